@@ -1,0 +1,74 @@
+# Build rules shared by every folder: one place for the language level, the warnings and the sanitizers.
+include_guard(GLOBAL)
+
+option(TARN_TESTS "Build the tests" ON)
+option(TARN_BENCH "Build the benchmarks" OFF)
+option(TARN_FUZZ "Build the fuzzers (clang only)" OFF)
+option(TARN_COVERAGE "Instrument for line coverage" OFF)
+set(TARN_SANITIZE "" CACHE STRING "Sanitizers to build with, as -fsanitize= takes them")
+
+set(CMAKE_CXX_STANDARD 20)
+set(CMAKE_CXX_STANDARD_REQUIRED ON)
+set(CMAKE_CXX_EXTENSIONS OFF)
+set(CMAKE_EXPORT_COMPILE_COMMANDS ON)
+set(CMAKE_RUNTIME_OUTPUT_DIRECTORY "${PROJECT_BINARY_DIR}/bin")
+
+find_program(TARN_CCACHE ccache)
+if(TARN_CCACHE)
+  set(CMAKE_CXX_COMPILER_LAUNCHER "${TARN_CCACHE}")
+endif()
+find_package(Threads REQUIRED)
+
+add_library(tarn_options INTERFACE)
+target_include_directories(tarn_options INTERFACE "${PROJECT_SOURCE_DIR}")
+target_link_libraries(tarn_options INTERFACE Threads::Threads)
+target_compile_options(tarn_options INTERFACE
+  -Wall -Wextra -Wpedantic -Werror -Wshadow -Wconversion -Wsign-conversion -Wold-style-cast -Wnon-virtual-dtor
+  -Woverloaded-virtual -Wcast-align -Wunused -Wdouble-promotion -Wformat=2 -Wimplicit-fallthrough
+  -fno-omit-frame-pointer)
+if(CMAKE_CXX_COMPILER_ID STREQUAL "GNU")
+  target_compile_options(tarn_options INTERFACE -Wduplicated-cond -Wlogical-op)
+endif()
+if(TARN_SANITIZE)
+  target_compile_options(tarn_options INTERFACE -fsanitize=${TARN_SANITIZE} -fno-sanitize-recover=all)
+  target_link_options(tarn_options INTERFACE -fsanitize=${TARN_SANITIZE})
+  # The sanitizers' own instrumentation upsets the flow analysis behind this one.
+  target_compile_options(tarn_options INTERFACE -Wno-maybe-uninitialized)
+endif()
+if(TARN_COVERAGE)
+  target_compile_options(tarn_options INTERFACE --coverage -fprofile-update=atomic)
+  target_link_options(tarn_options INTERFACE --coverage)
+endif()
+
+# tarn_library(NAME SOURCES file... [DEPENDS target...]): one floor or folder as a static library.
+function(tarn_library name)
+  cmake_parse_arguments(PARSE_ARGV 1 arg "" "" "SOURCES;DEPENDS")
+  if(arg_SOURCES)
+    add_library(${name} STATIC ${arg_SOURCES})
+    target_link_libraries(${name} PUBLIC tarn_options ${arg_DEPENDS})
+  else()
+    add_library(${name} INTERFACE)
+    target_link_libraries(${name} INTERFACE tarn_options ${arg_DEPENDS})
+  endif()
+endfunction()
+
+# tarn_program(NAME SOURCES file... [DEPENDS target...]): a program in build/<preset>/bin.
+function(tarn_program name)
+  cmake_parse_arguments(PARSE_ARGV 1 arg "" "" "SOURCES;DEPENDS")
+  add_executable(${name} ${arg_SOURCES})
+  target_link_libraries(${name} PRIVATE tarn_options ${arg_DEPENDS})
+endfunction()
+
+# tarn_test(NAME SOURCES file... [DEPENDS target...] [TIMEOUT seconds]): a GoogleTest program, each test known to ctest.
+function(tarn_test name)
+  cmake_parse_arguments(PARSE_ARGV 1 arg "" "TIMEOUT" "SOURCES;DEPENDS")
+  find_package(GTest REQUIRED)
+  include(GoogleTest)
+  if(NOT arg_TIMEOUT)
+    set(arg_TIMEOUT 120)
+  endif()
+  add_executable(${name} ${arg_SOURCES})
+  set_target_properties(${name} PROPERTIES RUNTIME_OUTPUT_DIRECTORY "${PROJECT_BINARY_DIR}/tests")
+  target_link_libraries(${name} PRIVATE tarn_options ${arg_DEPENDS} GTest::gtest GTest::gtest_main)
+  gtest_discover_tests(${name} DISCOVERY_MODE PRE_TEST DISCOVERY_TIMEOUT 60 PROPERTIES TIMEOUT ${arg_TIMEOUT})
+endfunction()

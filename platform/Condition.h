@@ -1,0 +1,30 @@
+// Condition: a lockable condition variable for the rare place where the server queue must wait for a back-end.
+//
+// Such a wait is deliberate: the platform doesn't take it for a hang (up to 180 seconds, the longest that a worker may
+// block the queue).
+#pragma once
+
+#include <chrono>
+#include <memory>
+
+namespace tarn::platform {
+
+class Condition {
+ public:
+  virtual ~Condition() = default;
+  virtual void lock() = 0;
+  virtual void unlock() = 0;
+  // Waits, locked before and after, until it is signalled or `timeout` has passed; false means the time is up. May wake
+  // without a signal.
+  virtual bool waitFor(std::chrono::duration<double> timeout) = 0;
+  // Wakes one waiter.
+  virtual void signal() = 0;
+};
+
+class Conditions {
+ public:
+  virtual ~Conditions() = default;
+  virtual std::shared_ptr<Condition> makeCondition() = 0;
+};
+
+}  // namespace tarn::platform

@@ -1,0 +1,25 @@
+// DefaultsStore: small settings that outlive a restart, by suite (or application domain) and key.
+//
+// Reads see what other processes have written. A store that can't be read is logged by the platform and reads as empty.
+// Threads: any.
+#pragma once
+
+#include <string_view>
+
+#include "plist/Value.h"
+
+namespace tarn::platform {
+
+class DefaultsStore {
+ public:
+  virtual ~DefaultsStore() = default;
+  // The value of `key` in `suite`; absent when there is none. Presence, text and boolean are read off the value.
+  virtual plist::Value value(std::string_view suite, std::string_view key) const = 0;
+  // The preference of `key` in an application domain, for the user of this name on any host.
+  virtual plist::Value preference(std::string_view key, std::string_view applicationDomain,
+                                  std::string_view user) const = 0;
+  // Stores a value; whether it is now on disk. An absent value removes the key.
+  [[nodiscard]] virtual bool setValue(std::string_view suite, std::string_view key, const plist::ValueView& value) = 0;
+};
+
+}  // namespace tarn::platform

@@ -1,0 +1,53 @@
+// TarnReportingServiceProtocol: the remote interface, the only way into the service. A listener's connections call the
+// object that the service exports to them, with arguments that are already decoded and checked.
+//
+// Every operation returns at once and does its work on the reporting server queue. Nothing is thrown. Each reply is
+// called at most once, on the server queue; a reply that is destroyed uncalled will never come.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "platform/UniqueFunction.h"
+#include "plist/Dictionary.h"
+
+namespace tarn::platform {
+
+struct RemoteError {
+  std::string_view domain;  // a text that lives for ever
+  std::int64_t code = 0;
+  std::string text;
+};
+
+template <class... Results>
+using Reply = UniqueFunction<void(const std::optional<RemoteError>& error, Results... results)>;
+
+// What setServiceType, setConfiguration and company answer: true, always.
+using Acknowledge = Reply<bool>;
+// Absent and empty mean the same to the service: every running session.
+using ReporterIDs = std::optional<std::vector<std::int64_t>>;
+
+class TarnReportingServiceProtocol {
+ public:
+  virtual ~TarnReportingServiceProtocol() = default;
+  virtual void createReportingSession(std::int64_t reporterID, Acknowledge reply) = 0;
+  virtual void setServiceType(std::uint16_t serviceType, std::int64_t reporterID, Acknowledge reply) = 0;
+  // Despite its name it answers the service type: 65535 for an unknown session.
+  virtual void getServiceNameForReporterID(std::int64_t reporterID, Reply<std::uint16_t> reply) = 0;
+  virtual void setConfiguration(plist::Dictionary configuration, std::int64_t reporterID, Acknowledge reply) = 0;
+  // The reply is held until the session stops.
+  virtual void startReportingSessionForID(std::int64_t reporterID, Acknowledge reply) = 0;
+  virtual void sendMessage(plist::Dictionary message, std::uint32_t category, std::uint16_t type,
+                           ReporterIDs reporterIDs, Reply<> reply) = 0;
+  virtual void stopReportingSessionForID(std::int64_t reporterID, Acknowledge reply) = 0;
+  virtual void destroyReportingSession(std::int64_t reporterID, Acknowledge reply) = 0;
+  // Answers "reporterID" and "serviceType"; 0 and 65535 for an unknown session.
+  virtual void reporterID(std::int64_t reporterID, Reply<plist::Dictionary> reply) = 0;
+  virtual void getAllReporters(Reply<std::vector<std::int64_t>> reply) = 0;
+  virtual void killService() = 0;
+};
+
+}  // namespace tarn::platform

@@ -1,0 +1,46 @@
+// WorkQueue: a serial queue. Work is run one piece at a time, in the order in which it was handed over.
+//
+// Threads: work may be handed over on any thread, that of the queue included. Nothing handed over is ever refused or
+// dropped while the process lives; whoever takes work from outside the process watches waiting() and takes less.
+#pragma once
+
+#include <chrono>
+#include <cstddef>
+#include <memory>
+#include <string_view>
+
+#include "platform/UniqueFunction.h"
+
+namespace tarn::platform {
+
+using Work = UniqueFunction<void()>;
+
+class WorkQueue {
+ public:
+  virtual ~WorkQueue() = default;
+  // Runs `work` behind everything handed over before.
+  virtual void async(Work work) = 0;
+  // Hands `work` over once `delay` has passed, never earlier. Equal moments keep the order of the calls.
+  virtual void asyncAfter(std::chrono::nanoseconds delay, Work work) = 0;
+  // Whether the caller runs as work of this queue.
+  virtual bool isCurrent() const noexcept = 0;
+  // Pieces of work handed over and not yet begun; delayed ones count from their moment on.
+  virtual std::size_t waiting() const noexcept = 0;
+};
+
+enum class QualityOfService {
+  UserInteractive,  // the server queue: on Linux it is served by the thread that also waits for the sockets
+  UserInitiated,
+  Utility,
+  Background,
+};
+
+class WorkQueues {
+ public:
+  virtual ~WorkQueues() = default;
+  // A new serial queue. Queues other than the user-interactive one share a small pool of threads, each keeping its own
+  // order. Work that is still waiting when its last owner lets go of a queue is run all the same.
+  virtual std::shared_ptr<WorkQueue> makeSerialQueue(std::string_view name, QualityOfService quality) = 0;
+};
+
+}  // namespace tarn::platform

@@ -1,0 +1,68 @@
+// KeyList: the ordered, repeat-free list of a dictionary's keys, shared by every dictionary that has just these keys in
+// this order.
+//
+// A client sends thousands of messages with one and the same key list. Sharing it leaves a logged message with its
+// values alone, and lets two messages be compared without looking at a key.
+//
+// Threads: any; a key list never changes. Making one takes a lock, reading does not.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <optional>
+#include <span>
+#include <string_view>
+
+#include "plist/Key.h"
+
+namespace tarn::plist {
+
+namespace detail {
+struct KeyListBody;
+}
+
+class KeyList {
+ public:
+  static constexpr std::size_t npos = static_cast<std::size_t>(-1);
+
+  KeyList() noexcept : body_(nullptr) {}  // the empty list
+  KeyList(const KeyList& other) noexcept;
+  KeyList(KeyList&& other) noexcept : body_(other.body_) { other.body_ = nullptr; }
+  KeyList& operator=(KeyList other) noexcept;
+  ~KeyList();
+
+  // The list of these keys, or nothing when one of them stands there twice.
+  static std::optional<KeyList> make(std::span<const std::string_view> texts);
+  static std::optional<KeyList> make(std::span<const Key> keys);
+
+  std::size_t size() const noexcept;
+  bool empty() const noexcept { return body_ == nullptr; }
+  const Key& operator[](std::size_t index) const noexcept;
+  // Position of the key, npos when it is not in the list. Constant time for long lists.
+  std::size_t indexOf(const Key& key) const noexcept;
+  std::size_t indexOf(std::string_view text) const noexcept;
+  // Whether any key holds a blank.
+  bool hasBlanks() const noexcept;
+  // Whether the list is exactly these texts in this order.
+  bool equals(std::span<const std::string_view> texts) const noexcept;
+  // Hash over the keys in order; hashOf gives the same for the same texts.
+  std::uint64_t hash() const noexcept;
+  static std::uint64_t combineHash(std::uint64_t hash, std::uint64_t keyHash) noexcept;
+
+  // This list with one more key behind it (the key is not in it yet), or without the key at `index`.
+  KeyList appending(const Key& key) const;
+  KeyList removing(std::size_t index) const;
+
+  friend bool operator==(const KeyList& a, const KeyList& b) noexcept { return a.body_ == b.body_; }
+
+  // How many distinct lists are alive now; for tests and the ledger.
+  static std::size_t aliveCount();
+
+ private:
+  friend class Dictionary;
+  explicit KeyList(detail::KeyListBody* body) noexcept : body_(body) {}
+
+  detail::KeyListBody* body_;
+};
+
+}  // namespace tarn::plist

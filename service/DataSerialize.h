@@ -1,0 +1,25 @@
+// DataSerialize: text forms of a property-list value (a dictionary or an array), for back-ends that need one.
+//
+// The XML is the property-list document type 1.0 with tab indentation; data in base64. Threads: any.
+#pragma once
+
+#include <optional>
+#include <string>
+
+#include "plist/ValueView.h"
+
+namespace tarn {
+
+class DataSerialize {
+ public:
+  // The value as an XML property list; nothing for an absent value or one that a property list can't hold.
+  static std::optional<std::string> getPlistBlob(const plist::ValueView& value);
+  // That XML as ASCII text: nothing when it holds anything else.
+  static std::optional<std::string> getXMLInfo(const plist::ValueView& value);
+  // That XML as UTF-8 text.
+  static std::optional<std::string> getDataXMLInfo(const plist::ValueView& value);
+  // That XML in base64 without line breaks.
+  static std::optional<std::string> getBase64XMLBlob(const plist::ValueView& value);
+};
+
+}  // namespace tarn

@@ -1,0 +1,94 @@
+// The one logging helper. Every log line of the system goes through TarnReportingLog, which puts the prefix
+// "%25s:%-5d " (module, line) before the text.
+//
+//   TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Info, kModule, "created reporting session for ID: %lli", id);
+//
+// A conversion in the text (%@, %s, %i, %d, %u, %ld, %lu, %lli, %lld, %llu, %f, %x) takes the next argument and prints it
+// by the argument's own type, so a wrong letter can't read wrong memory: integers in decimal (%x: hexadecimal), a
+// double as %f says with six decimals, or as its text form behind %@, texts as they are, property-list values by their
+// text form. "%%" is one percent sign. An argument may be a callable: it is called only when the line is written, so a
+// dear description costs nothing while its level is off.
+//
+// A disabled level costs one branch and formats nothing. Threads: any.
+#pragma once
+
+#include <concepts>
+#include <cstdint>
+#include <initializer_list>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <type_traits>
+#include <vector>
+
+#include "platform/Log.h"
+#include "plist/ValueView.h"
+
+namespace tarn {
+
+using platform::LogLevel;
+
+// The text of a log line together with the line where it stands.
+struct LogText {
+  consteval LogText(const char* format, int where = __builtin_LINE())  // NOLINT(google-explicit-constructor)
+      : text(format), line(where) {}
+  std::string_view text;
+  int line;
+};
+
+// One argument of a log line, looked at while the line is formed.
+using LogArgument = plist::ValueView;
+
+namespace detail {
+
+// The installed log, kept here so that the test of the level is one load and one branch.
+extern const platform::Log* installedLog;
+
+inline bool logEnabled(LogLevel level) noexcept {
+  return installedLog != nullptr && level >= installedLog->threshold();
+}
+void logWrite(const platform::LogCategory& category, LogLevel level, std::string_view module, const LogText& text,
+              std::initializer_list<LogArgument> arguments);
+
+// What an argument is turned into before it is looked at: a callable into its result, everything else into itself.
+template <class Argument>
+decltype(auto) logValue(const Argument& argument) {
+  if constexpr (std::invocable<const Argument&>) {
+    return argument();
+  } else {
+    return (argument);
+  }
+}
+
+}  // namespace detail
+
+template <class... Arguments>
+void TarnReportingLog(const platform::LogCategory& category, LogLevel level, std::string_view module,
+                      const LogText& text, const Arguments&... arguments) {
+  if (detail::logEnabled(level)) [[unlikely]] {
+    detail::logWrite(category, level, module, text, {LogArgument(detail::logValue(arguments))...});
+  }
+}
+
+// The same without the module prefix, for the few lines that carry none.
+template <class... Arguments>
+void TarnReportingLogPlain(const platform::LogCategory& category, LogLevel level, const LogText& text,
+                           const Arguments&... arguments) {
+  TarnReportingLog(category, level, {}, text, arguments...);
+}
+
+// The log categories, all under the subsystem "sys.oxbow.tarnkit".
+const platform::LogCategory& TarnReportingClientCategory();
+const platform::LogCategory& TarnReportingServiceDelegateCategory();
+const platform::LogCategory& TarnReportingSessionCategory();
+const platform::LogCategory& TarnReportingSessionRTCReportingCategory();
+const platform::LogCategory& TarnReportingDriverUtilityCategory();
+const platform::LogCategory& TarnReportingTraceCategory();
+const platform::LogCategory& TarnReportingWattlogCategory();
+const platform::LogCategory& TarnReportingPylonLogCategory();
+const platform::LogCategory& TarnReportingSnareLogCategory();
+const platform::LogCategory& TarnReportingSummaryLogCategory();
+const platform::LogCategory& TarnReportingDPLogCategory();
+const platform::LogCategory& TarnReportingAudioRegistrationCategory();
+
+}  // namespace tarn

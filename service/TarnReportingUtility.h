@@ -1,0 +1,56 @@
+// Utilities that the service, the sessions and the workers share.
+#pragma once
+
+#include <atomic>
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <span>
+#include <string>
+#include <string_view>
+
+#include "plist/Dictionary.h"
+
+namespace tarn {
+
+namespace platform {
+class Condition;
+class WorkQueue;
+struct LogCategory;
+}  // namespace platform
+
+// Waits until `flag` is set, for at most `timeoutSeconds` a wait: a wake-up that finds the flag unset waits the whole
+// time anew. Logs `waitingText` (info) before each wait and `timeoutText` (error) when the time is up. Returns whether
+// the flag was set. For the server queue, which it blocks.
+bool TarnReportingUtilityWait(platform::Condition& condition, double timeoutSeconds, const bool& flag,
+                              std::string_view waitingText, std::string_view timeoutText,
+                              const platform::LogCategory& logCategory);
+// Sets the flag and wakes one waiter. Threads: any. A pair of condition and flag serves one hand-over.
+void TarnReportingUtilitySignal(platform::Condition& condition, bool& flag);
+
+// Whether this is an internal build of the device; asked once, false when the device doesn't tell. Threads: any.
+bool TarnReportingUtilityIsInternalBuild();
+
+// The value under "HostApplicationDisplayID" as text, or "Unknown" when there is none.
+std::string TarnReportingUtilityRetrieveAppName(const plist::Dictionary& message);
+
+// A copy of the message with "tarnreporting_timestamp" (epoch seconds), "systemuptime_sec" (whole seconds, rounded) and
+// "processuptime_ms" (processor time used, in whole milliseconds) set.
+plist::Dictionary TarnReportingUtilityAddDates(const plist::Dictionary& message);
+
+// Rounds to `places` decimals, halves away from zero; negative places round to tens, hundreds and so on.
+double TarnReportingUtilityRoundWithPlaces(double value, std::int32_t places);
+
+// The bucket nearest to the number, as text with at most `places` decimals and at least one when `places` is not zero.
+// The buckets ascend; of two equally near ones the larger wins. Nothing when there are no buckets.
+std::optional<std::string> TarnReportingUtilityBucketNumberToString(double number, std::span<const double> buckets,
+                                                                    std::int32_t places);
+
+// Whether both dictionaries exist, both have the key, and the two values differ.
+bool TarnReportingUtilityKeyIsPresentAndHasChanged(const plist::Key& key, const plist::Dictionary* first,
+                                                   const plist::Dictionary* second);
+
+// The one serial queue on which all client, session and worker work runs; made on first use. Threads: any.
+const std::shared_ptr<platform::WorkQueue>& TarnReportingUtilityGetReportingServerQueue();
+
+}  // namespace tarn
