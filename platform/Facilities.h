@@ -1,5 +1,5 @@
-// Facilities: everything outside the process that the system may touch, as one struct of references. The entry point (or
-// a test's fixture) makes it and installs it once; what it refers to outlives all use.
+// Facilities: everything outside the process that the system may touch, as one struct of references. The entry point
+// (or a test's fixture) makes it and installs it once; what it refers to outlives all use.
 #pragma once
 
 namespace tarn::platform {

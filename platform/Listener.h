@@ -1,5 +1,5 @@
-// Listener and Connection: how clients reach the service. Threads: the platform's own, which on Linux is the thread that
-// also serves the server queue.
+// Listener and Connection: how clients reach the service. Threads: the platform's own, which on Linux is the thread
+// that also serves the server queue.
 #pragma once
 
 #include <cstdint>

@@ -21,7 +21,7 @@ struct LogEntry {
   LogLevel level;
   std::string_view module;  // empty when the entry carries no module prefix
   int line;
-  std::string_view text;    // with its "%25s:%-5d " prefix, when it has one; may hold several lines
+  std::string_view text;  // with its "%25s:%-5d " prefix, when it has one; may hold several lines
 };
 
 class Log {

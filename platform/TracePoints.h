@@ -1,4 +1,5 @@
-// TracePoints: informational marks in the system's trace, by code. Threads: any. A platform without a tracer drops them.
+// TracePoints: informational marks in the system's trace, by code. Threads: any. A platform without a tracer drops
+// them.
 #pragma once
 
 #include <cstdint>

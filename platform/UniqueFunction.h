@@ -21,9 +21,9 @@ class UniqueFunction<Result(Args...), kInlineBytes> {
   UniqueFunction() noexcept = default;
   UniqueFunction(std::nullptr_t) noexcept {}  // NOLINT(google-explicit-constructor): no callable
   template <class Callable>
-    requires(!std::same_as<std::remove_cvref_t<Callable>, UniqueFunction> &&
-             std::is_invocable_r_v<Result, std::remove_cvref_t<Callable>&, Args...>)
-  UniqueFunction(Callable&& callable) {  // NOLINT(google-explicit-constructor): any callable will do
+  requires(!std::same_as<std::remove_cvref_t<Callable>, UniqueFunction> &&
+           std::is_invocable_r_v<Result, std::remove_cvref_t<Callable>&, Args...>)
+      UniqueFunction(Callable&& callable) {  // NOLINT(google-explicit-constructor): any callable will do
     using Stored = std::remove_cvref_t<Callable>;
     if constexpr (fitsInline<Stored>()) {
       ::new (static_cast<void*>(storage_)) Stored(std::forward<Callable>(callable));
@@ -66,15 +66,14 @@ class UniqueFunction<Result(Args...), kInlineBytes> {
            std::is_nothrow_move_constructible_v<Stored>;
   }
   template <class Stored>
-  static constexpr Verbs kInlineVerbs{
-      [](void* at, Args&&... args) -> Result {
-        return std::invoke(*static_cast<Stored*>(at), std::forward<Args>(args)...);
-      },
-      [](void* from, void* to) noexcept {
-        ::new (to) Stored(std::move(*static_cast<Stored*>(from)));
-        static_cast<Stored*>(from)->~Stored();
-      },
-      [](void* at) noexcept { static_cast<Stored*>(at)->~Stored(); }};
+  static constexpr Verbs kInlineVerbs{[](void* at, Args&&... args) -> Result {
+                                        return std::invoke(*static_cast<Stored*>(at), std::forward<Args>(args)...);
+                                      },
+                                      [](void* from, void* to) noexcept {
+                                        ::new (to) Stored(std::move(*static_cast<Stored*>(from)));
+                                        static_cast<Stored*>(from)->~Stored();
+                                      },
+                                      [](void* at) noexcept { static_cast<Stored*>(at)->~Stored(); }};
   template <class Stored>
   static constexpr Verbs kHeapVerbs{
       [](void* at, Args&&... args) -> Result {

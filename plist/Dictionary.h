@@ -42,7 +42,9 @@ class Array {
   std::size_t size() const noexcept;
   bool empty() const noexcept { return body_ == nullptr; }
   ValueView operator[](std::size_t index) const noexcept;  // walks the items before it; absent beyond the end
+  // Stores a value behind all others, in a block of its own; to make a long array use PackedBuilder.
   void append(const ValueView& value);
+  std::size_t storageBytes() const noexcept;  // as of a dictionary
 
   class Iterator;
   Iterator begin() const noexcept;
@@ -68,8 +70,10 @@ class Dictionary {
   };
 
   Dictionary() noexcept : body_(nullptr) {}
-  // In the order given; of a key given twice the later value stands at the earlier place.
+  // In the order given; of a key given twice the later value stands at the earlier place. Absent values are left out.
   Dictionary(std::initializer_list<Member> members);
+  // The same of entries whose keys are all different and whose values are all present.
+  static Dictionary fromEntries(std::span<const Entry> entries);
   Dictionary(const Dictionary& other) noexcept;
   Dictionary(Dictionary&& other) noexcept : body_(other.body_) { other.body_ = nullptr; }
   Dictionary& operator=(Dictionary other) noexcept;
@@ -85,9 +89,13 @@ class Dictionary {
   ValueView get(std::string_view key) const noexcept;
   ValueView get(const char* key) const noexcept { return get(std::string_view(key)); }
   template <class AnyKey>
-  ValueView operator[](const AnyKey& key) const noexcept { return get(key); }
+  ValueView operator[](const AnyKey& key) const noexcept {
+    return get(key);
+  }
   template <class AnyKey>
-  bool contains(const AnyKey& key) const noexcept { return get(key).present(); }
+  bool contains(const AnyKey& key) const noexcept {
+    return get(key).present();
+  }
 
   // Stores a value: in the place that the key has, else behind all others. An absent value is not stored.
   // `value` may look into this very dictionary.
@@ -117,12 +125,18 @@ class Dictionary {
   detail::Body* body_;
 };
 
-inline bool operator==(const Dictionary& a, const Dictionary& b) noexcept { return ValueView(a) == ValueView(b); }
-inline bool operator==(const Array& a, const Array& b) noexcept { return ValueView(a) == ValueView(b); }
+inline bool operator==(const Dictionary& a, const Dictionary& b) noexcept {
+  return ValueView(a) == ValueView(b);
+}
+inline bool operator==(const Array& a, const Array& b) noexcept {
+  return ValueView(a) == ValueView(b);
+}
 
 class Array::Iterator {
  public:
   using value_type = ValueView;
+  using reference = ValueView;
+  using pointer = void;
   using difference_type = std::ptrdiff_t;
   using iterator_category = std::input_iterator_tag;
   ValueView operator*() const noexcept;
@@ -138,6 +152,8 @@ class Array::Iterator {
 class Dictionary::Iterator {
  public:
   using value_type = Entry;
+  using reference = Entry;
+  using pointer = void;
   using difference_type = std::ptrdiff_t;
   using iterator_category = std::input_iterator_tag;
   Entry operator*() const noexcept;

@@ -17,6 +17,8 @@ namespace tarn::plist {
 void appendJson(std::string& out, const ValueView& value);
 // Appends a JSON text with its quotes; control characters, quotes and backslashes escaped, all else as it is.
 void appendJsonText(std::string& out, std::string_view text);
+// Appends a text with its control characters escaped as in JSON and all else as it is.
+void appendEscapedControls(std::string& out, std::string_view text);
 // Appends the base64 form.
 void appendBase64(std::string& out, std::string_view bytes);
 

@@ -20,7 +20,7 @@ struct KeyText;
 class Key {
  public:
   // Interns `text` (UTF-8; may hold any byte, NUL included).
-  Key(std::string_view text);  // NOLINT(google-explicit-constructor): a name is a key
+  Key(std::string_view text);                             // NOLINT(google-explicit-constructor): a name is a key
   Key(const char* text) : Key(std::string_view(text)) {}  // NOLINT(google-explicit-constructor)
   Key(const Key& other) noexcept;
   Key(Key&& other) noexcept : text_(other.text_) { other.text_ = nullptr; }

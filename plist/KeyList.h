@@ -41,6 +41,7 @@ class KeyList {
   // Position of the key, npos when it is not in the list. Constant time for long lists.
   std::size_t indexOf(const Key& key) const noexcept;
   std::size_t indexOf(std::string_view text) const noexcept;
+  std::size_t indexOf(const char* text) const noexcept { return indexOf(std::string_view(text)); }
   // Whether any key holds a blank.
   bool hasBlanks() const noexcept;
   // Whether the list is exactly these texts in this order.
@@ -60,6 +61,7 @@ class KeyList {
 
  private:
   friend class Dictionary;
+  friend class PackedBuilder;
   explicit KeyList(detail::KeyListBody* body) noexcept : body_(body) {}
 
   detail::KeyListBody* body_;

@@ -7,6 +7,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <optional>
+#include <span>
 #include <string_view>
 #include <vector>
 
@@ -52,7 +53,8 @@ class PackedBuilder {
     std::uint64_t hash;
     bool holdsContainers;
   };
-  detail::Body* makeBody(const Level& level);
+  detail::Body* takeBody();
+  void dropLevel() noexcept;
 
   std::vector<std::byte> bytes_;
   std::vector<std::string_view> keys_;

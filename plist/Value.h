@@ -3,6 +3,8 @@
 
 #include <cstdint>
 #include <string>
+#include <string_view>
+#include <type_traits>
 #include <variant>
 #include <vector>
 
@@ -18,11 +20,19 @@ struct Data {
 class Value {
  public:
   Value() noexcept = default;  // absent
-  Value(const ValueView& view);  // NOLINT(google-explicit-constructor): a copy of what is looked at
-  template <class T>
-    requires std::constructible_from<ValueView, const T&> && (!std::same_as<T, ValueView>) &&
-             (!std::same_as<T, Value>)
-  Value(const T& value) : Value(ValueView(value)) {}  // NOLINT(google-explicit-constructor)
+  // The constructors are implicit, as those of ValueView: a copy of what is handed over.
+  // NOLINTBEGIN(google-explicit-constructor)
+  Value(const ValueView& view);
+  template <class Number>
+  requires std::is_arithmetic_v<Number> Value(Number value) : Value(ValueView(value)) {}
+  Value(Date value) : Value(ValueView(value)) {}
+  Value(std::string_view text) : Value(ValueView(text)) {}
+  Value(const std::string& text) : Value(ValueView(text)) {}
+  Value(const char* text) : Value(ValueView(text)) {}
+  Value(DataView data) : Value(ValueView(data)) {}
+  Value(const Array& array) : Value(ValueView(array)) {}
+  Value(const Dictionary& dictionary) : Value(ValueView(dictionary)) {}
+  // NOLINTEND(google-explicit-constructor)
 
   ValueView view() const noexcept;
   Kind kind() const noexcept { return view().kind(); }

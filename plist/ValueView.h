@@ -1,8 +1,8 @@
-// ValueView: a property-list value that lies somewhere else: inside a dictionary or an array, in a decoder's input, in a
-// local variable. The argument and result type of everything that stores or reads values.
+// ValueView: a property-list value that lies somewhere else: inside a dictionary or an array, in a decoder's input, in
+// a local variable. The argument and result type of everything that stores or reads values.
 //
-// A view is as long-lived as what it looks at: it is used at once or turned into a Value. Kind::None stands for "there is
-// no value" (an absent key) and is never stored.
+// A view is as long-lived as what it looks at: it is used at once or turned into a Value. Kind::None stands for "there
+// is no value" (an absent key) and is never stored.
 #pragma once
 
 #include <cstddef>

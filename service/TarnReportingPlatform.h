@@ -7,9 +7,9 @@ namespace platform {
 struct Facilities;
 }
 
-// Installs the facilities for everything that follows; they must outlive all use. Called by the entry point or by a test
-// fixture, before any other part of the system runs. A null pointer takes them away again (for fixtures), and with them
-// every process-wide answer that was read from them.
+// Installs the facilities for everything that follows; they must outlive all use. Called by the entry point or by a
+// test fixture, before any other part of the system runs. A null pointer takes them away again (for fixtures), and with
+// them every process-wide answer that was read from them.
 void TarnReportingInstallFacilities(const platform::Facilities* facilities);
 
 // The installed facilities. Threads: any.

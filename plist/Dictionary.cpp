@@ -1,0 +1,384 @@
+#include "plist/Dictionary.h"
+
+#include <algorithm>
+#include <array>
+#include <cstring>
+#include <vector>
+
+#include "plist/KeyListBody.h"
+#include "plist/Packed.h"
+
+namespace tarn::plist {
+
+namespace detail {
+
+void releaseDictionaryBody(Body* body) noexcept {
+  if (body == nullptr || body->references.fetch_sub(1, std::memory_order_acq_rel) != 1) {
+    return;
+  }
+  if (body->holdsContainers != 0) {
+    releaseContainers(body->data(), body->end());
+  }
+  releaseKeyList(body->keys);
+  freeBody(body);
+}
+
+}  // namespace detail
+
+namespace {
+
+using detail::Body;
+
+const std::byte* itemAt(const Body& body, std::size_t index) noexcept {
+  const std::byte* at = body.data();
+  for (; index > 0; --index) {
+    at += Packed::sizeAt(at);
+  }
+  return at;
+}
+
+bool isContainer(const ValueView& value) noexcept {
+  return value.kind() == Kind::Array || value.kind() == Kind::Dictionary;
+}
+
+// Offsets of all values, for readers that jump about in a long dictionary.
+std::vector<std::uint32_t> offsetsOf(const Body& body) {
+  std::vector<std::uint32_t> offsets;
+  for (const std::byte* at = body.data(); at != body.end(); at += Packed::sizeAt(at)) {
+    offsets.push_back(static_cast<std::uint32_t>(at - body.data()));
+  }
+  return offsets;
+}
+
+// Where the two runs of bytes first differ, `size` when they don't.
+std::size_t firstDifference(const std::byte* a, const std::byte* b, std::size_t size) noexcept {
+  std::size_t at = 0;
+  for (; at + 8 <= size; at += 8) {
+    std::uint64_t wordA = 0;
+    std::uint64_t wordB = 0;
+    std::memcpy(&wordA, a + at, 8);
+    std::memcpy(&wordB, b + at, 8);
+    if (wordA != wordB) {
+      return at + static_cast<std::size_t>(__builtin_ctzll(wordA ^ wordB)) / 8;
+    }
+  }
+  while (at < size && a[at] == b[at]) {
+    ++at;
+  }
+  return at;
+}
+
+std::size_t storageBytesBehind(const ValueView& value) noexcept {
+  switch (value.kind()) {
+    case Kind::Dictionary:
+      return value.dictionary().storageBytes();
+    case Kind::Array:
+      return value.array().storageBytes();
+    default:
+      return 0;
+  }
+}
+
+bool isIgnored(const Key& key, std::span<const Key> ignored) noexcept {
+  return std::find(ignored.begin(), ignored.end(), key) != ignored.end();
+}
+
+// Two dictionaries of one key list: runs of equal bytes are passed over eight at a time, and only the values that hold
+// a difference are looked at.
+bool equalWithSameKeys(const Body& a, const Body& b, std::span<const Key> ignored) noexcept {
+  const Key* const keys = a.keys->keys();
+  std::size_t index = 0;
+  const std::byte* atA = a.data();
+  const std::byte* atB = b.data();
+  while (atA != a.end()) {
+    const auto left = static_cast<std::size_t>(std::min(a.end() - atA, b.end() - atB));
+    const std::byte* const differing = atA + firstDifference(atA, atB, left);
+    if (differing == a.end()) {
+      return true;
+    }
+    for (std::size_t size = Packed::sizeAt(atA); atA + size <= differing; size = Packed::sizeAt(atA)) {
+      atA += size;
+      atB += size;
+      ++index;
+    }
+    if (!isIgnored(keys[index], ignored) && !(Packed::read(atA) == Packed::read(atB))) {
+      return false;
+    }
+    atA += Packed::sizeAt(atA);
+    atB += Packed::sizeAt(atB);
+    ++index;
+  }
+  return true;
+}
+
+bool equalWithOtherKeys(const Body& a, const Body& b, std::span<const Key> ignored) {
+  const auto counted = [&](const detail::KeyListBody& list) {
+    std::size_t count = list.count;
+    for (const Key& key : ignored) {
+      if (detail::indexInKeyList(&list, key) != KeyList::npos) {
+        --count;
+      }
+    }
+    return count;
+  };
+  if (counted(*a.keys) != counted(*b.keys)) {
+    return false;
+  }
+  const std::vector<std::uint32_t> offsets = offsetsOf(b);
+  std::size_t index = 0;
+  for (const std::byte* at = a.data(); at != a.end(); at += Packed::sizeAt(at)) {
+    const Key& key = a.keys->keys()[index++];
+    if (isIgnored(key, ignored)) {
+      continue;
+    }
+    const std::size_t position = detail::indexInKeyList(b.keys, key);
+    if (position == KeyList::npos || !(Packed::read(at) == Packed::read(b.data() + offsets[position]))) {
+      return false;
+    }
+  }
+  return true;
+}
+
+}  // namespace
+
+Dictionary::Dictionary(std::initializer_list<Member> members) : body_(nullptr) {
+  for (const Member& member : members) {
+    set(Key(member.key), member.value);
+  }
+}
+
+Dictionary Dictionary::fromEntries(std::span<const Entry> entries) {
+  std::vector<Key> keys;
+  keys.reserve(entries.size());
+  std::size_t bytes = 0;
+  bool containers = false;
+  for (const Entry& entry : entries) {
+    keys.push_back(entry.key);
+    bytes += Packed::sizeOf(entry.value);
+    containers = containers || isContainer(entry.value);
+  }
+  std::optional<KeyList> list = KeyList::make(std::span<const Key>(keys));
+  if (!list || list->empty()) {
+    return {};
+  }
+  Body* body = detail::makeBody(bytes);
+  body->holdsContainers = containers ? 1 : 0;
+  body->keys = std::exchange(list->body_, nullptr);
+  std::byte* to = body->data();
+  for (const Entry& entry : entries) {
+    to = Packed::write(to, entry.value);
+  }
+  return Dictionary(body);
+}
+
+Dictionary::Dictionary(const Dictionary& other) noexcept : body_(other.body_) {
+  detail::retainBody(body_);
+}
+
+Dictionary& Dictionary::operator=(Dictionary other) noexcept {
+  std::swap(body_, other.body_);
+  return *this;
+}
+
+Dictionary::~Dictionary() {
+  detail::releaseDictionaryBody(body_);
+}
+
+std::size_t Dictionary::size() const noexcept {
+  return body_ == nullptr ? 0 : body_->keys->count;
+}
+
+KeyList Dictionary::keys() const noexcept {
+  if (body_ == nullptr) {
+    return {};
+  }
+  detail::retainKeyList(body_->keys);
+  return KeyList(body_->keys);
+}
+
+bool Dictionary::hasKeyWithBlank() const noexcept {
+  return body_ != nullptr && body_->keys->hasBlanks;
+}
+
+ValueView Dictionary::get(const Key& key) const noexcept {
+  const std::size_t index = body_ == nullptr ? KeyList::npos : detail::indexInKeyList(body_->keys, key);
+  return index == KeyList::npos ? ValueView() : Packed::read(itemAt(*body_, index));
+}
+
+ValueView Dictionary::get(std::string_view key) const noexcept {
+  const std::size_t index = body_ == nullptr ? KeyList::npos : detail::indexInKeyList(body_->keys, key);
+  return index == KeyList::npos ? ValueView() : Packed::read(itemAt(*body_, index));
+}
+
+// Replaces `removed` bytes at `offset` by the packed value. A block that is shared is copied; a container that goes is
+// released, one that comes is held already.
+static Body* splice(Body* body, std::size_t offset, std::size_t removed, std::span<const std::byte> packed) {
+  const std::size_t tail = body->bytes - offset - removed;
+  const std::size_t bytes = offset + packed.size() + tail;
+  if (detail::isShared(body)) {
+    Body* copy = detail::makeBody(bytes);
+    copy->holdsContainers = body->holdsContainers;
+    copy->keys = body->keys;
+    detail::retainKeyList(copy->keys);
+    std::memcpy(copy->data(), body->data(), offset);
+    std::memcpy(copy->data() + offset + packed.size(), body->data() + offset + removed, tail);
+    if (body->holdsContainers != 0) {
+      detail::retainContainers(copy->data(), copy->data() + offset);
+      detail::retainContainers(copy->data() + offset + packed.size(), copy->end());
+    }
+    if (!packed.empty()) {
+      std::memcpy(copy->data() + offset, packed.data(), packed.size());
+    }
+    detail::releaseDictionaryBody(body);
+    return copy;
+  }
+  if (body->holdsContainers != 0) {
+    detail::releaseContainers(body->data() + offset, body->data() + offset + removed);
+  }
+  if (bytes > body->bytes) {
+    body = detail::resizeBody(body, bytes);
+  }
+  std::memmove(body->data() + offset + packed.size(), body->data() + offset + removed, tail);
+  if (bytes < body->bytes) {
+    body = detail::resizeBody(body, bytes);
+  }
+  if (!packed.empty()) {
+    std::memcpy(body->data() + offset, packed.data(), packed.size());
+  }
+  return body;
+}
+
+void Dictionary::set(const Key& key, const ValueView& value) {
+  const std::size_t size = Packed::sizeOf(value);
+  if (size == 0) {
+    return;
+  }
+  // The value is packed before the block is touched, because it may look into that block.
+  std::array<std::byte, 128> small;
+  std::vector<std::byte> large(size > small.size() ? size : 0);
+  std::byte* const packed = large.empty() ? small.data() : large.data();
+  Packed::write(packed, value);
+  const bool container = isContainer(value);
+
+  if (body_ == nullptr) {
+    KeyList list = KeyList().appending(key);
+    body_ = detail::makeBody(0);
+    body_->keys = std::exchange(list.body_, nullptr);
+    body_ = splice(body_, 0, 0, {packed, size});
+  } else if (const std::size_t index = detail::indexInKeyList(body_->keys, key); index != KeyList::npos) {
+    const std::byte* const at = itemAt(*body_, index);
+    body_ = splice(body_, static_cast<std::size_t>(at - body_->data()), Packed::sizeAt(at), {packed, size});
+  } else {
+    KeyList list = keys().appending(key);
+    body_ = splice(body_, body_->bytes, 0, {packed, size});
+    std::swap(body_->keys, list.body_);
+  }
+  if (container) {
+    body_->holdsContainers = 1;
+  }
+}
+
+bool Dictionary::remove(const Key& key) {
+  const std::size_t index = body_ == nullptr ? KeyList::npos : detail::indexInKeyList(body_->keys, key);
+  if (index == KeyList::npos) {
+    return false;
+  }
+  if (size() == 1) {
+    clear();
+    return true;
+  }
+  KeyList list = keys().removing(index);
+  const std::byte* const at = itemAt(*body_, index);
+  body_ = splice(body_, static_cast<std::size_t>(at - body_->data()), Packed::sizeAt(at), {});
+  std::swap(body_->keys, list.body_);
+  return true;
+}
+
+void Dictionary::merge(const Dictionary& other) {
+  if (other.body_ == nullptr || body_ == other.body_) {
+    return;
+  }
+  if (body_ == nullptr) {
+    *this = other;
+    return;
+  }
+  const std::vector<std::uint32_t> offsets = offsetsOf(*other.body_);
+  std::vector<Entry> entries;
+  entries.reserve(size() + other.size());
+  for (const Entry& own : *this) {
+    const std::size_t index = detail::indexInKeyList(other.body_->keys, own.key);
+    entries.push_back(
+        {own.key, index == KeyList::npos ? own.value : Packed::read(other.body_->data() + offsets[index])});
+  }
+  for (const Entry& added : other) {
+    if (detail::indexInKeyList(body_->keys, added.key) == KeyList::npos) {
+      entries.push_back(added);
+    }
+  }
+  *this = fromEntries(entries);
+}
+
+Dictionary::Iterator Dictionary::begin() const noexcept {
+  Iterator iterator;
+  if (body_ != nullptr) {
+    iterator.at_ = body_->data();
+    iterator.key_ = body_->keys->keys();
+  }
+  return iterator;
+}
+
+Dictionary::Iterator Dictionary::end() const noexcept {
+  Iterator iterator;
+  iterator.at_ = body_ == nullptr ? nullptr : body_->end();
+  return iterator;
+}
+
+Dictionary::Entry Dictionary::Iterator::operator*() const noexcept {
+  return {*key_, Packed::read(at_)};
+}
+
+Dictionary::Iterator& Dictionary::Iterator::operator++() noexcept {
+  at_ += Packed::sizeAt(at_);
+  ++key_;
+  return *this;
+}
+
+bool Dictionary::equalsIgnoring(const Dictionary& other, std::span<const Key> ignored) const noexcept {
+  if (body_ == other.body_) {
+    return true;
+  }
+  if (body_ == nullptr || other.body_ == nullptr) {
+    const Dictionary& one = body_ == nullptr ? other : *this;
+    return std::all_of(one.begin(), one.end(), [&](const Entry& entry) { return isIgnored(entry.key, ignored); });
+  }
+  return body_->keys == other.body_->keys ? equalWithSameKeys(*body_, *other.body_, ignored)
+                                          : equalWithOtherKeys(*body_, *other.body_, ignored);
+}
+
+std::size_t Dictionary::storageBytes() const noexcept {
+  if (body_ == nullptr) {
+    return 0;
+  }
+  std::size_t bytes = sizeof(Body) + body_->bytes;
+  if (body_->holdsContainers != 0) {
+    for (const Entry& entry : *this) {
+      bytes += storageBytesBehind(entry.value);
+    }
+  }
+  return bytes;
+}
+
+std::size_t Array::storageBytes() const noexcept {
+  if (body_ == nullptr) {
+    return 0;
+  }
+  std::size_t bytes = sizeof(Body) + body_->bytes;
+  if (body_->holdsContainers != 0) {
+    for (const ValueView& item : *this) {
+      bytes += storageBytesBehind(item);
+    }
+  }
+  return bytes;
+}
+
+}  // namespace tarn::plist

@@ -1,0 +1,190 @@
+#include "plist/Json.h"
+
+#include <array>
+#include <charconv>
+#include <cmath>
+
+#include "plist/CalendarDate.h"
+#include "plist/Dictionary.h"
+
+namespace tarn::plist {
+
+namespace {
+
+void appendControl(std::string& out, char character) {
+  switch (character) {
+    case '\b':
+      out += "\\b";
+      return;
+    case '\f':
+      out += "\\f";
+      return;
+    case '\n':
+      out += "\\n";
+      return;
+    case '\r':
+      out += "\\r";
+      return;
+    case '\t':
+      out += "\\t";
+      return;
+    default: {
+      constexpr std::string_view kHex = "0123456789abcdef";
+      const auto value = static_cast<unsigned char>(character);
+      out += "\\u00";
+      out += kHex[value >> 4U];
+      out += kHex[value & 0xFU];
+    }
+  }
+}
+
+bool isControl(char character) {
+  return static_cast<unsigned char>(character) < 0x20;
+}
+
+template <class NeedsEscape, class AppendEscape>
+void appendEscaped(std::string& out, std::string_view text, NeedsEscape needsEscape, AppendEscape appendEscape) {
+  std::size_t begin = 0;
+  for (std::size_t at = 0; at < text.size(); ++at) {
+    if (needsEscape(text[at])) [[unlikely]] {
+      out.append(text, begin, at - begin);
+      appendEscape(text[at]);
+      begin = at + 1;
+    }
+  }
+  out.append(text, begin);
+}
+
+template <class Floating>
+void appendJsonNumber(std::string& out, Floating value) {
+  const std::size_t before = out.size();
+  if (!std::isfinite(value)) {
+    out += '"';
+    appendNumber(out, value);
+    out += '"';
+    return;
+  }
+  appendNumber(out, value);
+  if (out.find_first_of(".e", before) == std::string::npos) {
+    out += ".0";
+  }
+}
+
+void appendJsonDate(std::string& out, Date date) {
+  const auto calendar = detail::calendarDate(date.epochSeconds);
+  if (!calendar) {
+    return appendJsonNumber(out, date.epochSeconds);
+  }
+  out += '"';
+  detail::appendDateAndTime(out, *calendar, 'T');
+  if (calendar->microsecond != 0) {
+    std::string decimals = std::to_string(1000000 + calendar->microsecond);
+    decimals.front() = '.';
+    decimals.erase(decimals.find_last_not_of('0') + 1);
+    out += decimals;
+  }
+  out += "Z\"";
+}
+
+void appendInteger(std::string& out, auto value) {
+  std::array<char, 24> digits;
+  const auto result = std::to_chars(digits.begin(), digits.end(), value);
+  out.append(digits.data(), result.ptr);
+}
+
+void appendJsonArray(std::string& out, const Array& array) {
+  out += '[';
+  bool first = true;
+  for (const ValueView& item : array) {
+    if (!first) {
+      out += ',';
+    }
+    first = false;
+    appendJson(out, item);
+  }
+  out += ']';
+}
+
+void appendJsonObject(std::string& out, const Dictionary& dictionary) {
+  out += '{';
+  bool first = true;
+  for (const Dictionary::Entry& entry : dictionary) {
+    if (!first) {
+      out += ',';
+    }
+    first = false;
+    appendJsonText(out, entry.key.text());
+    out += ':';
+    appendJson(out, entry.value);
+  }
+  out += '}';
+}
+
+}  // namespace
+
+void appendEscapedControls(std::string& out, std::string_view text) {
+  appendEscaped(out, text, isControl, [&](char character) { appendControl(out, character); });
+}
+
+void appendJsonText(std::string& out, std::string_view text) {
+  out += '"';
+  appendEscaped(
+      out, text, [](char character) { return isControl(character) || character == '"' || character == '\\'; },
+      [&](char character) {
+        if (isControl(character)) {
+          appendControl(out, character);
+        } else {
+          out += '\\';
+          out += character;
+        }
+      });
+  out += '"';
+}
+
+void appendBase64(std::string& out, std::string_view bytes) {
+  constexpr std::string_view kAlphabet = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
+  const auto byteAt = [&](std::size_t at) -> std::uint32_t {
+    return at < bytes.size() ? static_cast<unsigned char>(bytes[at]) : 0U;
+  };
+  for (std::size_t at = 0; at < bytes.size(); at += 3) {
+    const std::uint32_t group = byteAt(at) << 16U | byteAt(at + 1) << 8U | byteAt(at + 2);
+    out += kAlphabet[group >> 18U];
+    out += kAlphabet[(group >> 12U) & 63U];
+    out += at + 1 < bytes.size() ? kAlphabet[(group >> 6U) & 63U] : '=';
+    out += at + 2 < bytes.size() ? kAlphabet[group & 63U] : '=';
+  }
+}
+
+void appendJson(std::string& out, const ValueView& value) {
+  switch (value.kind()) {
+    case Kind::None:
+      out += "null";
+      return;
+    case Kind::Bool:
+      out += value.boolValue() ? "true" : "false";
+      return;
+    case Kind::Signed:
+      return appendInteger(out, value.signedValue());
+    case Kind::Unsigned:
+      return appendInteger(out, value.unsignedValue());
+    case Kind::Float:
+      return appendJsonNumber(out, value.floatValue());
+    case Kind::Double:
+      return appendJsonNumber(out, value.doubleValue());
+    case Kind::Date:
+      return appendJsonDate(out, value.dateValue());
+    case Kind::Text:
+      return appendJsonText(out, value.text());
+    case Kind::Data:
+      out += '"';
+      appendBase64(out, value.data());
+      out += '"';
+      return;
+    case Kind::Array:
+      return appendJsonArray(out, value.array());
+    case Kind::Dictionary:
+      return appendJsonObject(out, value.dictionary());
+  }
+}
+
+}  // namespace tarn::plist

@@ -1,0 +1,140 @@
+#include "plist/Key.h"
+
+#include <atomic>
+#include <cstdlib>
+#include <cstring>
+#include <mutex>
+#include <new>
+#include <unordered_map>
+
+#include "plist/KeyText.h"
+
+namespace tarn::plist {
+
+namespace {
+
+// Seeded by where the program was loaded, so that a client can't prepare names that collide.
+std::uint64_t hashSeed() noexcept {
+  static const char anchor = 0;
+  return static_cast<std::uint64_t>(reinterpret_cast<std::uintptr_t>(&anchor));
+}
+
+std::uint64_t mix(std::uint64_t hash, std::uint64_t word) noexcept {
+  hash = (hash ^ word) * 0x9FB21C651E98DF25U;
+  return hash ^ (hash >> 32U);
+}
+
+struct Hasher {
+  std::size_t operator()(std::string_view text) const noexcept { return Key::hashOf(text); }
+};
+
+// Every text in use, found by itself. A text leaves the table, under its lock, when the last key lets go.
+struct Table {
+  std::mutex mutex;
+  std::unordered_map<std::string_view, detail::KeyText*, Hasher> texts;
+};
+
+Table& table() {
+  static Table* const instance = new Table;  // never destroyed: keys of static storage outlive everything
+  return *instance;
+}
+
+detail::KeyText* makeText(std::string_view text) {
+  void* memory = std::malloc(sizeof(detail::KeyText) + text.size());
+  if (memory == nullptr) {
+    throw std::bad_alloc();
+  }
+  auto* made = ::new (memory) detail::KeyText{
+      {1}, static_cast<std::uint32_t>(text.size()), Key::hashOf(text), text.find(' ') != std::string_view::npos};
+  if (!text.empty()) {
+    std::memcpy(made->chars(), text.data(), text.size());
+  }
+  return made;
+}
+
+}  // namespace
+
+namespace detail {
+
+KeyText* internText(std::string_view text) {
+  Table& all = table();
+  const std::lock_guard lock(all.mutex);
+  if (const auto found = all.texts.find(text); found != all.texts.end()) {
+    found->second->references.fetch_add(1, std::memory_order_relaxed);
+    return found->second;
+  }
+  KeyText* made = makeText(text);
+  all.texts.emplace(made->text(), made);
+  return made;
+}
+
+void releaseText(KeyText* text) noexcept {
+  if (text == nullptr || !releaseUnlessLast(text->references)) {
+    return;
+  }
+  // The last reference goes under the lock, so that nobody finds a text that is about to be freed.
+  Table& all = table();
+  {
+    const std::lock_guard lock(all.mutex);
+    if (text->references.fetch_sub(1, std::memory_order_acq_rel) != 1) {
+      return;
+    }
+    all.texts.erase(text->text());
+  }
+  std::free(text);
+}
+
+}  // namespace detail
+
+std::uint64_t Key::hashOf(std::string_view text) noexcept {
+  std::uint64_t hash = mix(hashSeed(), text.size());
+  const char* at = text.data();
+  std::size_t left = text.size();
+  for (; left >= 8; at += 8, left -= 8) {
+    std::uint64_t word = 0;
+    std::memcpy(&word, at, 8);
+    hash = mix(hash, word);
+  }
+  if (left > 0) {
+    std::uint64_t word = 0;
+    std::memcpy(&word, at, left);
+    hash = mix(hash, word);
+  }
+  return hash;
+}
+
+Key::Key(std::string_view text) : text_(detail::internText(text)) {}
+
+Key::Key(const Key& other) noexcept : text_(other.text_) {
+  if (text_ != nullptr) {
+    text_->references.fetch_add(1, std::memory_order_relaxed);
+  }
+}
+
+Key& Key::operator=(Key other) noexcept {
+  std::swap(text_, other.text_);
+  return *this;
+}
+
+Key::~Key() {
+  detail::releaseText(text_);
+}
+
+std::string_view Key::text() const noexcept {
+  return text_->text();
+}
+
+std::uint64_t Key::hash() const noexcept {
+  return text_->hash;
+}
+
+bool Key::hasBlank() const noexcept {
+  return text_->hasBlank;
+}
+
+std::size_t Key::internedCount() {
+  const std::lock_guard lock(table().mutex);
+  return table().texts.size();
+}
+
+}  // namespace tarn::plist

@@ -1,0 +1,213 @@
+#include "plist/Dictionary.h"
+
+#include <gtest/gtest.h>
+
+#include <array>
+#include <cmath>
+#include <string>
+#include <vector>
+
+#include "plist/Value.h"
+
+namespace tarn::plist {
+namespace {
+
+std::vector<std::string> keysOf(const Dictionary& dictionary) {
+  std::vector<std::string> keys;
+  for (const auto& entry : dictionary) {
+    keys.emplace_back(entry.key.text());
+  }
+  return keys;
+}
+
+TEST(Dictionary, EmptyHoldsNothing) {
+  const Dictionary empty;
+  EXPECT_TRUE(empty.empty());
+  EXPECT_EQ(empty.size(), 0U);
+  EXPECT_FALSE(empty.get("any").present());
+  EXPECT_TRUE(empty.begin() == empty.end());
+  EXPECT_EQ(empty, Dictionary());
+  EXPECT_EQ(empty.storageBytes(), 0U);
+}
+
+TEST(Dictionary, KeepsInsertionOrderAndReplacesInPlace) {
+  Dictionary dictionary{{"b", 1}, {"a", "text"}, {"c", 2.5}};
+  dictionary.set("a", 700000);
+  EXPECT_EQ(keysOf(dictionary), (std::vector<std::string>{"b", "a", "c"}));
+  EXPECT_EQ(dictionary["a"].signedValue(), 700000);
+  EXPECT_EQ(dictionary["b"].signedValue(), 1);
+  EXPECT_EQ(dictionary["c"].doubleValue(), 2.5);
+}
+
+TEST(Dictionary, RememberTheKindOfEveryNumber) {
+  const Dictionary dictionary{{"bool", true},  {"signed", -5},      {"unsigned", 5U},       {"float", 0.1F},
+                              {"double", 0.1}, {"date", Date{1.5}}, {"large", 1ULL << 63U}, {"small", INT64_MIN}};
+  EXPECT_EQ(dictionary["bool"].kind(), Kind::Bool);
+  EXPECT_EQ(dictionary["signed"].kind(), Kind::Signed);
+  EXPECT_EQ(dictionary["unsigned"].kind(), Kind::Unsigned);
+  EXPECT_EQ(dictionary["float"].kind(), Kind::Float);
+  EXPECT_EQ(dictionary["double"].kind(), Kind::Double);
+  EXPECT_EQ(dictionary["date"].dateValue().epochSeconds, 1.5);
+  EXPECT_EQ(dictionary["large"].unsignedValue(), 1ULL << 63U);
+  EXPECT_EQ(dictionary["small"].signedValue(), INT64_MIN);
+}
+
+TEST(Dictionary, KeepsIntegersOfEveryWidth) {
+  const std::array<std::int64_t, 13> numbers{0,     1,      -1,         127,         -128,      128,      32767,
+                                             32768, -32769, 2147483647, -2147483648, INT64_MAX, INT64_MIN};
+  for (const std::int64_t number : numbers) {
+    EXPECT_EQ((Dictionary{{"n", number}}["n"].signedValue()), number);
+  }
+  for (const std::uint64_t number : {std::uint64_t{0}, std::uint64_t{255}, std::uint64_t{256}, std::uint64_t{65536},
+                                     std::uint64_t{1} << 32U, UINT64_MAX}) {
+    EXPECT_EQ((Dictionary{{"n", number}}["n"].unsignedValue()), number);
+  }
+}
+
+TEST(Dictionary, KeepsTextsOfEveryLength) {
+  for (const std::size_t length : {0U, 1U, 15U, 255U, 256U, 70000U}) {
+    const std::string text(length, 'x');
+    Dictionary dictionary{{"before", 1}, {"text", text}, {"data", DataView{text}}, {"behind", 2}};
+    EXPECT_EQ(dictionary["text"].text(), text);
+    EXPECT_EQ(dictionary["data"].data(), text);
+    EXPECT_EQ(dictionary["behind"].signedValue(), 2);
+  }
+}
+
+TEST(Dictionary, CopyDoesNotSeeLaterChanges) {
+  Dictionary original{{"a", 1}, {"nested", Dictionary{{"x", 1}}}};
+  const Dictionary copy = original;
+  EXPECT_TRUE(copy.sharesStorageWith(original));
+  original.set("a", "changed");
+  original.set("b", 2);
+  Dictionary nested = original["nested"].dictionary();
+  nested.set("x", 9);
+  EXPECT_EQ(copy["a"].signedValue(), 1);
+  EXPECT_EQ(copy.size(), 2U);
+  EXPECT_EQ(copy["nested"].dictionary()["x"].signedValue(), 1);
+  EXPECT_EQ(original["nested"].dictionary()["x"].signedValue(), 1);
+}
+
+TEST(Dictionary, SetTakesAValueOutOfItself) {
+  Dictionary dictionary{{"a", "some text that is longer than a few bytes"}, {"b", 1}};
+  dictionary.set("b", dictionary["a"]);
+  dictionary.set("c", dictionary["a"]);
+  dictionary.set("a", 1);
+  EXPECT_EQ(dictionary["b"].text(), "some text that is longer than a few bytes");
+  EXPECT_EQ(dictionary["c"].text(), "some text that is longer than a few bytes");
+}
+
+TEST(Dictionary, SetOfAnAbsentValueStoresNothing) {
+  Dictionary dictionary{{"a", 1}};
+  dictionary.set("a", ValueView());
+  dictionary.set("b", ValueView());
+  EXPECT_EQ(dictionary, (Dictionary{{"a", 1}}));
+}
+
+TEST(Dictionary, RemoveTakesTheEntryAlone) {
+  Dictionary dictionary{{"a", 1}, {"b", Array{1, 2}}, {"c", 3}};
+  const Dictionary copy = dictionary;
+  EXPECT_TRUE(dictionary.remove("b"));
+  EXPECT_FALSE(dictionary.remove("b"));
+  EXPECT_EQ(dictionary, (Dictionary{{"a", 1}, {"c", 3}}));
+  EXPECT_TRUE(dictionary.remove("a"));
+  EXPECT_TRUE(dictionary.remove("c"));
+  EXPECT_TRUE(dictionary.empty());
+  EXPECT_EQ(copy["b"].array().size(), 2U);
+}
+
+TEST(Dictionary, MergeReplacesInPlaceAndAppendsInOrder) {
+  Dictionary dictionary{{"a", 1}, {"b", 2}};
+  dictionary.merge({{"c", 3}, {"a", "new"}, {"d", 4}});
+  EXPECT_EQ(keysOf(dictionary), (std::vector<std::string>{"a", "b", "c", "d"}));
+  EXPECT_EQ(dictionary["a"].text(), "new");
+  dictionary.merge({});
+  EXPECT_EQ(dictionary.size(), 4U);
+  Dictionary empty;
+  empty.merge(dictionary);
+  EXPECT_EQ(empty, dictionary);
+}
+
+TEST(Dictionary, ThousandsOfKeysAreFoundAndMerged) {
+  Dictionary left;
+  Dictionary right;
+  for (int i = 0; i < 3000; ++i) {
+    left.set(Key("left" + std::to_string(i)), i);
+    right.set(Key("right" + std::to_string(i)), i);
+  }
+  left.merge(right);
+  ASSERT_EQ(left.size(), 6000U);
+  EXPECT_EQ(left["left2999"].signedValue(), 2999);
+  EXPECT_EQ(left["right0"].signedValue(), 0);
+  EXPECT_FALSE(left.contains("right3000"));
+}
+
+TEST(Dictionary, EqualityIgnoresOrderAndNumberKinds) {
+  const Dictionary one{{"a", 1}, {"b", 1.0}, {"c", true}};
+  const Dictionary other{{"c", 1}, {"b", true}, {"a", 1.0}};
+  EXPECT_EQ(one, other);
+  EXPECT_FALSE(one == (Dictionary{{"a", 1}, {"b", 1.0}}));
+  EXPECT_FALSE(one == (Dictionary{{"a", 1}, {"b", 1.0}, {"d", true}}));
+}
+
+TEST(Dictionary, EqualityLooksIntoContainers) {
+  const Dictionary one{{"list", Array{1, "x", Dictionary{{"k", 2.0}}}}};
+  EXPECT_EQ(one, (Dictionary{{"list", Array{1.0, "x", Dictionary{{"k", 2}}}}}));
+  EXPECT_FALSE(one == (Dictionary{{"list", Array{1, "x", Dictionary{{"k", 3}}}}}));
+  EXPECT_FALSE(one == (Dictionary{{"list", Array{1, "x"}}}));
+}
+
+TEST(Dictionary, EqualsIgnoringLeavesTheNamedKeysOut) {
+  const std::array<Key, 2> ignored{Key("time"), Key("uptime")};
+  const Dictionary one{{"a", 1}, {"time", 5.25}, {"b", "text"}, {"uptime", 3}};
+  EXPECT_TRUE(one.equalsIgnoring({{"a", 1}, {"time", 9999.5}, {"b", "text"}, {"uptime", 300000}}, ignored));
+  EXPECT_TRUE(one.equalsIgnoring({{"a", 1}, {"b", "text"}}, ignored));
+  EXPECT_TRUE(one.equalsIgnoring({{"b", "text"}, {"a", 1.0}, {"uptime", "x"}}, ignored));
+  EXPECT_FALSE(one.equalsIgnoring({{"a", 2}, {"time", 5.25}, {"b", "text"}, {"uptime", 3}}, ignored));
+  EXPECT_FALSE(one.equalsIgnoring({{"a", 1}, {"time", 5.25}, {"b", "texts"}, {"uptime", 3}}, ignored));
+  EXPECT_FALSE(one.equalsIgnoring({{"a", 1}, {"b", "text"}, {"c", 1}}, ignored));
+  EXPECT_TRUE((Dictionary{{"time", 1}}.equalsIgnoring({}, ignored)));
+  EXPECT_FALSE((Dictionary{{"a", 1}}.equalsIgnoring({}, ignored)));
+}
+
+TEST(Dictionary, ConstructionWithAKeyTwiceKeepsTheLaterValue) {
+  const Dictionary dictionary{{"a", 1}, {"b", 2}, {"a", 3}};
+  EXPECT_EQ(dictionary.size(), 2U);
+  EXPECT_EQ(dictionary["a"].signedValue(), 3);
+}
+
+TEST(Dictionary, StorageCountsContainersInside) {
+  const Dictionary flat{{"a", "12345678"}};
+  const Dictionary nested{{"a", flat}, {"b", Array{flat}}};
+  EXPECT_GE(flat.storageBytes(), 10U);
+  EXPECT_GE(nested.storageBytes(), 2 * flat.storageBytes());
+}
+
+TEST(Array, AppendsIteratesAndIndexes) {
+  Array array{1, "two"};
+  const Array copy = array;
+  array.append(array[1]);
+  array.append(Array{3});
+  ASSERT_EQ(array.size(), 4U);
+  EXPECT_EQ(array[2].text(), "two");
+  EXPECT_EQ(array[3].array()[0].signedValue(), 3);
+  EXPECT_FALSE(array[4].present());
+  EXPECT_EQ(copy.size(), 2U);
+  EXPECT_EQ(copy, (Array{1, "two"}));
+}
+
+TEST(Value, OwnsWhatItCopied) {
+  Value value;
+  EXPECT_FALSE(value.present());
+  {
+    const std::string text = "a text that goes away, longer than a short string";
+    value = Value(text);
+  }
+  EXPECT_EQ(value.view().text(), "a text that goes away, longer than a short string");
+  value = Value(Dictionary{{"a", 1}});
+  EXPECT_EQ(value.view().dictionary()["a"].signedValue(), 1);
+  EXPECT_EQ(Value(1), Value(1.0));
+}
+
+}  // namespace
+}  // namespace tarn::plist

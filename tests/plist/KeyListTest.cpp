@@ -1,0 +1,98 @@
+#include "plist/KeyList.h"
+
+#include <gtest/gtest.h>
+
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "plist/Dictionary.h"
+
+namespace tarn::plist {
+namespace {
+
+TEST(Key, EqualTextsAreOneKey) {
+  const Key one("volume");
+  const Key other(std::string("vol") + "ume");
+  EXPECT_EQ(one, other);
+  EXPECT_EQ(one.hash(), Key::hashOf("volume"));
+  EXPECT_FALSE(one == Key("Volume"));
+  EXPECT_TRUE(Key("a b").hasBlank());
+  EXPECT_FALSE(Key("a\tb").hasBlank());
+}
+
+TEST(Key, TextThatNobodyUsesIsForgotten) {
+  const std::size_t before = Key::internedCount();
+  {
+    const Dictionary dictionary{{"a key of this test alone", 1}};
+    EXPECT_EQ(Key::internedCount(), before + 1);
+  }
+  EXPECT_EQ(Key::internedCount(), before);
+}
+
+TEST(KeyList, SameKeysInTheSameOrderAreOneList) {
+  const std::vector<std::string_view> texts{"one", "two"};
+  const auto list = KeyList::make(texts);
+  ASSERT_TRUE(list);
+  EXPECT_EQ(*list, KeyList().appending("one").appending("two"));
+  EXPECT_FALSE(*list == KeyList().appending("two").appending("one"));
+  EXPECT_EQ(*list, list->appending("three").removing(2));
+  EXPECT_EQ(list->removing(1).removing(0), KeyList());
+}
+
+TEST(KeyList, RefusesAKeyTwice) {
+  const std::vector<std::string_view> few{"one", "two", "one"};
+  EXPECT_FALSE(KeyList::make(few));
+  std::vector<std::string> names;
+  for (int i = 0; i < 40; ++i) {
+    names.push_back("name" + std::to_string(i % 39));
+  }
+  const std::vector<std::string_view> many(names.begin(), names.end());
+  EXPECT_FALSE(KeyList::make(many));
+}
+
+TEST(KeyList, FindsKeysInShortAndLongLists) {
+  for (const int count : {1, 16, 17, 500}) {
+    KeyList list;
+    for (int i = 0; i < count; ++i) {
+      list = list.appending(Key("key" + std::to_string(i)));
+    }
+    for (int i = 0; i < count; ++i) {
+      EXPECT_EQ(list.indexOf(Key("key" + std::to_string(i))), static_cast<std::size_t>(i));
+      EXPECT_EQ(list.indexOf("key" + std::to_string(i)), static_cast<std::size_t>(i));
+    }
+    EXPECT_EQ(list.indexOf("other"), KeyList::npos);
+  }
+}
+
+TEST(KeyList, ListThatNobodyUsesIsForgotten) {
+  const std::size_t before = KeyList::aliveCount();
+  {
+    const Dictionary dictionary{{"first of this test", 1}, {"second of this test", 2}};
+    EXPECT_GT(KeyList::aliveCount(), before);
+  }
+  EXPECT_EQ(KeyList::aliveCount(), before);
+}
+
+TEST(KeyListStress, ThreadsMakeAndDropTheSameListsAtOnce) {
+  const std::size_t before = KeyList::aliveCount();
+  std::vector<std::thread> threads;
+  for (int t = 0; t < 4; ++t) {
+    threads.emplace_back([] {
+      for (int i = 0; i < 3000; ++i) {
+        Dictionary dictionary{{"shared a", i}, {"shared b", "text"}};
+        dictionary.set(Key("shared c" + std::to_string(i % 3)), i);
+        const Dictionary copy = dictionary;
+        dictionary.remove("shared a");
+        EXPECT_EQ(copy["shared a"].signedValue(), i);
+      }
+    });
+  }
+  for (std::thread& thread : threads) {
+    thread.join();
+  }
+  EXPECT_EQ(KeyList::aliveCount(), before);
+}
+
+}  // namespace
+}  // namespace tarn::plist

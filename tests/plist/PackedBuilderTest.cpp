@@ -1,0 +1,80 @@
+#include "plist/PackedBuilder.h"
+
+#include <gtest/gtest.h>
+
+#include <string>
+#include <vector>
+
+namespace tarn::plist {
+namespace {
+
+TEST(PackedBuilder, BuildsNestedContainers) {
+  KeyListCache cache;
+  PackedBuilder builder;
+  builder.begin();
+  builder.add("a", 1);
+  builder.begin();
+  builder.add("x", "inner");
+  const auto inner = builder.finishDictionary(cache);
+  ASSERT_TRUE(inner);
+  builder.add("b", *inner);
+  builder.begin();
+  builder.add(2.5);
+  builder.add(*inner);
+  builder.add("c", builder.finishArray());
+  const auto outer = builder.finishDictionary(cache);
+  ASSERT_TRUE(outer);
+  EXPECT_EQ(*outer, (Dictionary{{"a", 1}, {"b", Dictionary{{"x", "inner"}}}, {"c", Array{2.5, *inner}}}));
+}
+
+TEST(PackedBuilder, EmptyContainersHoldNothing) {
+  KeyListCache cache;
+  PackedBuilder builder;
+  builder.begin();
+  EXPECT_EQ(builder.finishDictionary(cache), Dictionary());
+  builder.begin();
+  EXPECT_TRUE(builder.finishArray().empty());
+}
+
+TEST(PackedBuilder, RefusesAKeyGivenTwiceAndGoesOn) {
+  KeyListCache cache;
+  PackedBuilder builder;
+  builder.begin();
+  builder.add("a", Array{1});
+  builder.add("a", 2);
+  EXPECT_FALSE(builder.finishDictionary(cache));
+  builder.begin();
+  builder.add("a", 2);
+  EXPECT_EQ(builder.finishDictionary(cache), (Dictionary{{"a", 2}}));
+}
+
+TEST(PackedBuilder, ResetDropsWhatIsOpen) {
+  KeyListCache cache;
+  PackedBuilder builder;
+  builder.begin();
+  builder.add("a", Dictionary{{"x", 1}});
+  builder.begin();
+  builder.add("b", 1);
+  builder.reset();
+  builder.begin();
+  builder.add("c", 1);
+  EXPECT_EQ(builder.finishDictionary(cache), (Dictionary{{"c", 1}}));
+}
+
+TEST(KeyListCache, StaysRightWhenListsShareASlot) {
+  KeyListCache cache;
+  PackedBuilder builder;
+  for (int round = 0; round < 3; ++round) {
+    for (int i = 0; i < 1000; ++i) {
+      const std::string key = "cached" + std::to_string(i);
+      builder.begin();
+      builder.add(key, i);
+      const auto made = builder.finishDictionary(cache);
+      ASSERT_TRUE(made);
+      ASSERT_EQ((*made)[key].signedValue(), i);
+    }
+  }
+}
+
+}  // namespace
+}  // namespace tarn::plist
