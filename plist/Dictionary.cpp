@@ -355,6 +355,11 @@ bool Dictionary::equalsIgnoring(const Dictionary& other, std::span<const Key> ig
                                           : equalWithOtherKeys(*body_, *other.body_, ignored);
 }
 
+bool Dictionary::sharesKeysWith(const Dictionary& other) const noexcept {
+  const auto listOf = [](const Body* body) { return body == nullptr ? nullptr : body->keys; };
+  return listOf(body_) == listOf(other.body_);
+}
+
 std::size_t Dictionary::storageBytes() const noexcept {
   if (body_ == nullptr) {
     return 0;

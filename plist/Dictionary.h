@@ -114,6 +114,8 @@ class Dictionary {
 
   // Whether both are the same shared block: equal for sure, without looking.
   bool sharesStorageWith(const Dictionary& other) const noexcept { return body_ == other.body_; }
+  // Whether both have the same keys in the same order.
+  bool sharesKeysWith(const Dictionary& other) const noexcept;
   // Bytes held by this dictionary and, counted at each place, by the containers in it; without the key lists.
   std::size_t storageBytes() const noexcept;
 

@@ -1,0 +1,137 @@
+// The intake of TarnReportingSession: what happens to a message before any worker sees it, and to whom it goes.
+#include <array>
+#include <mutex>
+#include <unordered_map>
+
+#include "platform/Clock.h"
+#include "platform/Facilities.h"
+#include "platform/TracePoints.h"
+#include "plist/Value.h"
+#include "service/TarnReportingLog.h"
+#include "service/TarnReportingPlatform.h"
+#include "service/TarnReportingUtility.h"
+#include "session/TarnReportingSession.h"
+#include "session/TarnReportingSessionKeys.h"
+
+namespace tarn {
+
+namespace {
+
+constexpr std::string_view kModule = "TarnReportingSession";
+constexpr std::uint32_t kTraceMessage = 0x21044838;
+constexpr double kOldestStampSeconds = 31536000;  // 365 days
+
+std::string withoutBlanks(std::string_view key) {
+  std::string replaced(key);
+  for (char& character : replaced) {
+    if (character == ' ') {
+      character = '_';
+    }
+  }
+  return replaced;
+}
+
+}  // namespace
+
+void TarnReportingSession::sendMessage(const MessagePointer& message, platform::Reply<> reply) {
+  ++totalMessageCount_;
+  addMissingDates(*message);
+  removeWhiteSpaceFromKeys(*message);
+  addAudioMessageTag(*message);
+  addAppName(*message);
+  TarnReportingFacilities().tracePoints.emit(kTraceMessage, reporterID_);
+  message->setIsSessionStarted(started_);
+  message->setIsRedundant(messageIsRedundant(*message));
+  TarnReportingLog(
+      TarnReportingSessionCategory(), LogLevel::Debug, kModule,
+      "TarnReportingSessionWorker action=sendMessage reporterID=%lli app=%@ redundant=%@ message=%@", reporterID_,
+      [&] { return TarnReportingUtilityRetrieveAppName(configuration_); }, message->isRedundant() ? "YES" : "NO",
+      message->message());
+  previousValues_.merge(message->message());
+  if (!message->isRedundant()) {
+    log_.append(message);
+  }
+  workers_.deliver(message, reporterID_);
+  if (reply) {
+    reply(std::nullopt);
+  }
+}
+
+void TarnReportingSession::addMissingDates(TarnReportingSessionMessage& message) {
+  const double now = TarnReportingFacilities().clock.epochSeconds();
+  plist::Dictionary& payload = message.mutableMessage();
+  const plist::ValueView stamp = payload.get(keys::kTimestamp);
+  if (!stamp) {
+    payload.set(keys::kInvalidTimestamp, "nil");
+    payload.set(keys::kTimestamp, now);
+  } else if (stamp.asDouble() < now - kOldestStampSeconds) {
+    payload.set(keys::kInvalidTimestamp, stamp);
+    payload.set(keys::kTimestamp, now);
+  }
+}
+
+void TarnReportingSession::removeWhiteSpaceFromKeys(TarnReportingSessionMessage& message) {
+  plist::Dictionary& payload = message.mutableMessage();
+  if (!payload.hasKeyWithBlank()) {
+    return;
+  }
+  // Later entries win over earlier ones of the same new name, and all of them over a key that had no blank.
+  std::vector<plist::Key> names;
+  names.reserve(payload.size());
+  std::vector<plist::Dictionary::Entry> entries;
+  std::unordered_map<plist::Key, std::size_t> places;
+  for (const plist::Dictionary::Entry& entry : payload) {
+    if (!entry.key.hasBlank()) {
+      places.emplace(entry.key, entries.size());
+      entries.push_back(entry);
+    }
+  }
+  for (const plist::Dictionary::Entry& entry : payload) {
+    if (!entry.key.hasBlank()) {
+      continue;
+    }
+    names.emplace_back(withoutBlanks(entry.key.text()));
+    const auto [place, isNew] = places.emplace(names.back(), entries.size());
+    if (isNew) {
+      entries.push_back({names.back(), entry.value});
+    } else {
+      entries[place->second].value = entry.value;
+    }
+  }
+  payload = plist::Dictionary::fromEntries(entries);
+}
+
+void TarnReportingSession::addAudioMessageTag(TarnReportingSessionMessage& message) {
+  std::string tag = TarnReportingUtilityCategoryString(message.category());
+  tag += TarnReportingUtilityTypeString(message.type());
+  message.mutableMessage().set(keys::kAudioTag, tag);
+}
+
+void TarnReportingSession::addAppName(TarnReportingSessionMessage& message) const {
+  const std::lock_guard guard(message);
+  plist::Dictionary& payload = message.mutableMessage();
+  const plist::ValueView present = payload.get(keys::kHostApplicationDisplayID);
+  if (present && !(present == plist::ValueView("Unknown"))) {
+    return;
+  }
+  payload.set(keys::kHostApplicationDisplayID, TarnReportingUtilityRetrieveAppName(configuration_));
+}
+
+bool TarnReportingSession::messageIsRedundant(const TarnReportingSessionMessage& message) const {
+  static const std::array<plist::Key, 3> kIgnored{keys::kProcessUptime, keys::kSystemUptime, keys::kTimestamp};
+  if (message.type() == AudioEventType::Error || message.category() == AudioEventCategory::Error) {
+    return false;
+  }
+  const TarnReportingSessionMessage* const earlier = log_.newest(message.category(), message.type());
+  if (earlier == nullptr || !message.message().equalsIgnoring(earlier->message(), kIgnored)) {
+    return false;
+  }
+  TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, kModule, "marking event redundant");
+  return true;
+}
+
+double TarnReportingSession::getEpochTimeFromTarnReportingStateMessage(const TarnReportingSessionMessage& message) {
+  return message.message().get(keys::kTimestamp).asDouble();
+}
+
+}  // namespace tarn

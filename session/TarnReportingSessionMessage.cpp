@@ -1,0 +1,81 @@
+#include "session/TarnReportingSessionMessage.h"
+
+#include <algorithm>
+#include <cmath>
+#include <numeric>
+
+#include "service/TarnReportingLog.h"
+#include "session/TarnReportingSessionKeys.h"
+
+namespace tarn {
+
+namespace {
+
+constexpr std::string_view kModule = "TarnReportingSessionMessage";
+
+double sortingTime(const TarnReportingSessionMessage& message) {
+  const double time = message.message().get(keys::kTimestamp).asDouble();
+  return std::isnan(time) ? 0 : time;  // a stamp that is no number would leave no order at all
+}
+
+}  // namespace
+
+const TarnReportingSessionMessage::DestinationWorkers& TarnReportingSessionMessage::destinationWorkers()
+    const noexcept {
+  static const DestinationWorkers kEveryone;
+  return destinationWorkers_ ? *destinationWorkers_ : kEveryone;
+}
+
+void TarnReportingSessionMessage::setDestinationWorkers(DestinationWorkers workers) {
+  destinationWorkers_ = workers.empty() ? nullptr : std::make_unique<const DestinationWorkers>(std::move(workers));
+}
+
+std::string TarnReportingSessionMessage::description() const {
+  std::string text = "category=" + TarnReportingUtilityCategoryString(category_) + " type=";
+  text += TarnReportingUtilityTypeString(type_);
+  text += ' ';
+  plist::appendDescription(text, message_);
+  return text;
+}
+
+std::shared_ptr<TarnReportingSessionMessage> TarnReportingSessionMessage::copyWithZone() const {
+  TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, kModule, "copyWithZone");
+  auto copy = std::make_shared<TarnReportingSessionMessage>(message_, category_, type_);
+  copy->isRedundant_ = isRedundant_;
+  copy->isSessionStarted_ = isSessionStarted_;
+  return copy;
+}
+
+void TarnReportingSessionMessage::sortMessages(TarnReportingSessionMessages& messages) {
+  // Clients nearly always send in time order: look before doing anything, and read each stamp once.
+  std::vector<double> times;
+  times.reserve(messages.size());
+  for (const auto& message : messages) {
+    times.push_back(sortingTime(*message));
+  }
+  if (std::is_sorted(times.begin(), times.end())) {
+    return;
+  }
+  std::vector<std::uint32_t> order(messages.size());
+  std::iota(order.begin(), order.end(), 0U);
+  std::stable_sort(order.begin(), order.end(),
+                   [&](std::uint32_t left, std::uint32_t right) { return times[left] < times[right]; });
+  TarnReportingSessionMessages sorted;
+  for (const std::uint32_t index : order) {
+    sorted.push_back(std::move(messages[index]));
+  }
+  messages.swap(sorted);
+}
+
+void TarnReportingSessionMessage::lock() const noexcept {
+  while (guard_.test_and_set(std::memory_order_acquire)) {
+    guard_.wait(true, std::memory_order_relaxed);
+  }
+}
+
+void TarnReportingSessionMessage::unlock() const noexcept {
+  guard_.clear(std::memory_order_release);
+  guard_.notify_one();
+}
+
+}  // namespace tarn

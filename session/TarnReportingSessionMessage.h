@@ -1,0 +1,78 @@
+// TarnReportingSessionMessage: one message on its way through a session, with the flags that the session sets.
+//
+// A session keeps up to millions of these, so a record is 24 bytes beside its payload. Records are shared: the
+// session's log and every worker hold the same one; a worker that wants to keep or change a record copies it. Producers
+// may change the payload of a logged record in place.
+//
+// Threads: the server queue, apart from the payload's readers on back-end threads.
+#pragma once
+
+#include <atomic>
+#include <deque>
+#include <memory>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "plist/Dictionary.h"
+#include "service/TarnReportingVocabulary.h"
+
+namespace tarn {
+
+class TarnReportingSessionMessage;
+
+using TarnReportingSessionMessages = std::deque<std::shared_ptr<TarnReportingSessionMessage>>;
+
+class TarnReportingSessionMessage {
+ public:
+  // Names of worker classes; the texts live for ever.
+  using DestinationWorkers = std::vector<std::string_view>;
+
+  TarnReportingSessionMessage(plist::Dictionary message, AudioEventCategory category, AudioEventType type)
+      : message_(std::move(message)), category_(category), type_(type) {}
+  TarnReportingSessionMessage(const TarnReportingSessionMessage&) = delete;
+  TarnReportingSessionMessage& operator=(const TarnReportingSessionMessage&) = delete;
+
+  const plist::Dictionary& message() const noexcept { return message_; }
+  plist::Dictionary& mutableMessage() noexcept { return message_; }
+  AudioEventCategory category() const noexcept { return category_; }
+  AudioEventType type() const noexcept { return type_; }
+
+  // Whether the message repeats an earlier one of its session.
+  bool isRedundant() const noexcept { return isRedundant_; }
+  void setIsRedundant(bool redundant) noexcept { isRedundant_ = redundant; }
+  // Whether the session was started when the message arrived.
+  bool isSessionStarted() const noexcept { return isSessionStarted_; }
+  void setIsSessionStarted(bool started) noexcept { isSessionStarted_ = started; }
+
+  // The classes whose workers alone handle the message; empty means every consumer.
+  const DestinationWorkers& destinationWorkers() const noexcept;
+  void setDestinationWorkers(DestinationWorkers workers);
+
+  // "category=%@ type=%@ %@"
+  std::string description() const;
+
+  // A record of its own with the same payload, category, type and flags. The destinations are left out on purpose: a
+  // copy is addressed to everyone until someone addresses it.
+  std::shared_ptr<TarnReportingSessionMessage> copyWithZone() const;
+
+  // Sorts in place and stably by epoch time; records without a time stamp count as 0.
+  static void sortMessages(TarnReportingSessionMessages& messages);
+
+  // The record's own guard (BasicLockable), for changes to a record that a worker may still hold.
+  void lock() const noexcept;
+  void unlock() const noexcept;
+
+ private:
+  plist::Dictionary message_;
+  std::unique_ptr<const DestinationWorkers> destinationWorkers_;
+  const AudioEventCategory category_;
+  const AudioEventType type_;
+  bool isRedundant_ : 1 = false;
+  bool isSessionStarted_ : 1 = false;
+  mutable std::atomic_flag guard_;
+};
+
+static_assert(sizeof(TarnReportingSessionMessage) == 24);
+
+}  // namespace tarn

@@ -1,0 +1,43 @@
+// TarnReportingSessionTallyWorker: forwards every message of a session, as it arrives, to the analytics-event service,
+// under two event names: one of the message's category and type, one with the session's service name before them.
+//
+// It runs everywhere: from the session's creation on, in single-message sessions, for every service type.
+#pragma once
+
+#include <memory>
+#include <string>
+#include <string_view>
+#include <unordered_map>
+
+#include "service/TarnReportingVocabulary.h"
+#include "session/TarnReportingSessionWorker.h"
+
+namespace tarn {
+
+class TarnReportingSessionTallyWorker : public TarnReportingSessionWorkerProtocol,
+                                        public TarnReportingSessionWorkerConsumerProtocol {
+ public:
+  static constexpr std::string_view kClassName = "TarnReportingSessionTallyWorker";
+
+  // For every session.
+  static std::unique_ptr<TarnReportingSessionTallyWorker> initWithSession(
+      const std::shared_ptr<TarnReportingSession>& session);
+  static bool startOnInit() { return true; }
+  static bool handleSingleMessageSession() { return true; }
+  using TarnReportingSessionWorkerProtocol::TarnReportingSessionWorkerProtocol;
+
+  void handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) override;
+
+ private:
+  struct EventNames {
+    std::string ofMessage;  // "sys.oxbow.tarnkit.%@.%@"
+    std::string ofService;  // "sys.oxbow.%@.%@.%@"
+  };
+  const EventNames& namesFor(AudioServiceType serviceType, AudioEventCategory category, AudioEventType type);
+
+  // The names of the few kinds of messages that a session sees over and over; begun anew when a client floods it.
+  static constexpr std::size_t kNamesLimit = 256;
+  std::unordered_map<std::uint64_t, EventNames> names_;
+};
+
+}  // namespace tarn

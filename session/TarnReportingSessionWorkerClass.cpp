@@ -1,0 +1,28 @@
+#include "session/TarnReportingSessionWorkerClass.h"
+
+#include "service/TarnReportingLog.h"
+
+namespace tarn {
+
+TarnReportingSessionWorkerClasses::TarnReportingSessionWorkerClasses(
+    std::span<const TarnReportingSessionWorkerClass> table) {
+  for (const TarnReportingSessionWorkerClass& row : table) {
+    if (row.initWithSession == nullptr) {
+      TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, "TarnReportingSession",
+                       "Worker does not implement initWithSession! %@", row.name);
+      continue;
+    }
+    initializableWorkerClasses.push_back(&row);
+    if (row.asConsumer != nullptr) {
+      consumerWorkerClasses.push_back(&row);
+    }
+    if (row.isProducer) {
+      producerWorkerClasses.push_back(&row);
+    }
+    if (row.startOnInit != nullptr && row.startOnInit()) {
+      startOnInitWorkerClasses.push_back(&row);
+    }
+  }
+}
+
+}  // namespace tarn
