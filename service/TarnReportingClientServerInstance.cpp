@@ -1,0 +1,326 @@
+#include "service/TarnReportingClientServerInstance.h"
+
+#include <algorithm>
+
+#include "platform/Facilities.h"
+#include "platform/ProcessControl.h"
+#include "platform/TracePoints.h"
+#include "platform/WorkQueue.h"
+#include "service/TarnReportingLog.h"
+#include "service/TarnReportingPlatform.h"
+#include "service/TarnReportingServiceDelegateProtocol.h"
+#include "service/TarnReportingUtility.h"
+#include "session/TarnReportingSession.h"
+
+namespace tarn {
+
+namespace {
+
+constexpr std::string_view kModule = "TarnReportingClientServerInstance";
+constexpr std::string_view kErrorDomain = "sys.oxbow.audio.reporting";
+constexpr std::int64_t kReportingDisabled = 1;
+constexpr int kKilledExitStatus = 2;
+
+constexpr std::uint32_t kTraceCreate = 0x21044814;
+constexpr std::uint32_t kTraceStart = 0x21044818;
+constexpr std::uint32_t kTraceStop = 0x2104481C;
+constexpr std::uint32_t kTraceSend = 0x21044824;
+
+template <class... Arguments>
+void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
+  TarnReportingLog(TarnReportingClientCategory(), level, kModule, text, arguments...);
+}
+
+void trace(std::uint32_t code, std::int64_t reporterID) {
+  TarnReportingFacilities().tracePoints.emit(code, reporterID);
+}
+
+void onServerQueue(platform::Work work) {
+  TarnReportingUtilityGetReportingServerQueue()->async(std::move(work));
+}
+
+// Sends the reply that a start call left with the session, if there is one.
+void sendHeldReply(TarnReportingSession& session) {
+  if (platform::Acknowledge held = std::move(session.transactionCompleteBlock())) {
+    held(std::nullopt, true);
+  }
+}
+
+plist::ValueView textOf(const platform::ReporterIDs& reporterIDs, plist::Array& storage) {
+  if (!reporterIDs) {
+    return {};
+  }
+  for (const std::int64_t reporterID : *reporterIDs) {
+    storage.append(reporterID);
+  }
+  return storage;
+}
+
+}  // namespace
+
+std::shared_ptr<TarnReportingClientServerInstance> TarnReportingClientServerInstance::initWithPID(
+    std::int32_t processIdentifier, std::weak_ptr<TarnReportingServiceDelegateProtocol> delegate) {
+  struct Constructible : TarnReportingClientServerInstance {
+    Constructible(std::int32_t pid, std::weak_ptr<TarnReportingServiceDelegateProtocol> service)
+        : TarnReportingClientServerInstance(pid, std::move(service)) {}
+  };
+  return std::make_shared<Constructible>(processIdentifier, std::move(delegate));
+}
+
+TarnReportingClientServerInstance::TarnReportingClientServerInstance(
+    std::int32_t processIdentifier, std::weak_ptr<TarnReportingServiceDelegateProtocol> delegate)
+    : processIdentifier_(processIdentifier), delegate_(std::move(delegate)) {
+  log(LogLevel::Debug, "new client with pid %lu", processIdentifier_);
+}
+
+TarnReportingClientServerInstance::~TarnReportingClientServerInstance() {
+  log(LogLevel::Default, "dealloc %i from the server client list", processIdentifier_);
+}
+
+void TarnReportingClientServerInstance::createReportingSession(std::int64_t reporterID, platform::Acknowledge reply) {
+  onServerQueue([self = shared_from_this(), reporterID, reply = std::move(reply)]() mutable {
+    self->create(reporterID);
+    reply(std::nullopt, true);
+  });
+}
+
+void TarnReportingClientServerInstance::setServiceType(std::uint16_t serviceType, std::int64_t reporterID,
+                                                       platform::Acknowledge reply) {
+  onServerQueue([self = shared_from_this(), serviceType, reporterID, reply = std::move(reply)]() mutable {
+    self->retype(serviceType, reporterID);
+    reply(std::nullopt, true);
+  });
+}
+
+void TarnReportingClientServerInstance::getServiceNameForReporterID(std::int64_t reporterID,
+                                                                    platform::Reply<std::uint16_t> reply) {
+  onServerQueue([self = shared_from_this(), reporterID, reply = std::move(reply)]() mutable {
+    log(LogLevel::Default, "fetching seviceType");
+    const auto session = reporterID == 0 ? nullptr : self->findReportingSessionForID(reporterID, true);
+    reply(std::nullopt, static_cast<std::uint16_t>(session ? session->serviceType() : AudioServiceType::Unknown));
+  });
+}
+
+void TarnReportingClientServerInstance::setConfiguration(plist::Dictionary configuration, std::int64_t reporterID,
+                                                         platform::Acknowledge reply) {
+  onServerQueue([self = shared_from_this(), configuration = std::move(configuration), reporterID,
+                 reply = std::move(reply)]() mutable {
+    log(LogLevel::Default, "setting configuration");
+    if (const auto session = self->findReportingSessionForID(reporterID, false)) {
+      session->updateConfigurationWithContentsOfConfiguration(&configuration);
+    }
+    reply(std::nullopt, true);
+  });
+}
+
+void TarnReportingClientServerInstance::startReportingSessionForID(std::int64_t reporterID,
+                                                                   platform::Acknowledge reply) {
+  onServerQueue([self = shared_from_this(), reporterID, reply = std::move(reply)]() mutable {
+    self->start(reporterID, std::move(reply));
+  });
+}
+
+void TarnReportingClientServerInstance::sendMessage(plist::Dictionary message, std::uint32_t category,
+                                                    std::uint16_t type, platform::ReporterIDs reporterIDs,
+                                                    platform::Reply<> reply) {
+  if ((!reporterIDs || reporterIDs->empty()) && TarnReportingUtilityIsInternalBuild()) {
+    // Workers of internal builds tell by this key that the message came without a session.
+    if (const auto service = delegate_.lock(); service && service->isReportingEnabled()) {
+      message.set("sendSingleMessage", true);
+    }
+  }
+  onServerQueue([self = shared_from_this(), message = std::move(message), category, type,
+                 reporterIDs = std::move(reporterIDs),
+                 reply = std::move(reply)]() mutable { self->send(message, category, type, reporterIDs, reply); });
+}
+
+void TarnReportingClientServerInstance::stopReportingSessionForID(std::int64_t reporterID,
+                                                                  platform::Acknowledge reply) {
+  onServerQueue([self = shared_from_this(), reporterID, reply = std::move(reply)]() mutable {
+    self->stop(reporterID);
+    reply(std::nullopt, true);
+  });
+}
+
+void TarnReportingClientServerInstance::destroyReportingSession(std::int64_t reporterID, platform::Acknowledge reply) {
+  onServerQueue([self = shared_from_this(), reporterID, reply = std::move(reply)]() mutable {
+    self->destroy(reporterID);
+    reply(std::nullopt, true);
+  });
+}
+
+void TarnReportingClientServerInstance::reporterID(std::int64_t reporterID, platform::Reply<plist::Dictionary> reply) {
+  onServerQueue([self = shared_from_this(), reporterID, reply = std::move(reply)]() mutable {
+    log(LogLevel::Default, "validating reporter %lli", reporterID);
+    plist::Dictionary answer{{"reporterID", 0}, {"serviceType", static_cast<int>(AudioServiceType::Unknown)}};
+    if (const auto session = self->findReportingSessionForID(reporterID, true)) {
+      answer.set("reporterID", reporterID);
+      answer.set("serviceType", static_cast<int>(session->serviceType()));
+    }
+    reply(std::nullopt, std::move(answer));
+  });
+}
+
+void TarnReportingClientServerInstance::getAllReporters(platform::Reply<std::vector<std::int64_t>> reply) {
+  onServerQueue([self = shared_from_this(), reply = std::move(reply)]() mutable {
+    std::vector<std::int64_t> reporters;
+    if (const auto service = self->delegate_.lock()) {
+      for (const auto& client : service->getAllClients()) {
+        client->sessions_.forEach([&](std::int64_t reporterID, const std::shared_ptr<TarnReportingSession>&) {
+          reporters.push_back(reporterID);
+        });
+      }
+    }
+    reply(std::nullopt, std::move(reporters));
+  });
+}
+
+void TarnReportingClientServerInstance::killService() {
+  onServerQueue([] {
+    log(LogLevel::Default, "DESTROYING SERVICE");
+    TarnReportingFacilities().processControl.exitProcess(kKilledExitStatus);
+  });
+}
+
+void TarnReportingClientServerInstance::handleConnectionError() {
+  onServerQueue([self = shared_from_this()] { self->endClient(); });
+}
+
+std::shared_ptr<TarnReportingSession> TarnReportingClientServerInstance::findReportingSessionForID(
+    std::int64_t reporterID, bool acrossAllClients) {
+  auto session = sessions_.find(reporterID);
+  if (!session && acrossAllClients) {
+    if (const auto service = delegate_.lock()) {
+      session = service->findReportingSessionForID(reporterID);
+    }
+  }
+  return session;
+}
+
+std::shared_ptr<TarnReportingSession> TarnReportingClientServerInstance::makeSession(std::int64_t reporterID) {
+  auto session = TarnReportingSession::initWithID(reporterID, {processIdentifier_});
+  session->setClientProcessName(clientProcessName_);
+  return session;
+}
+
+void TarnReportingClientServerInstance::logReportingSessions() {
+  if (const auto service = delegate_.lock()) {
+    service->logReportingSessions();
+  }
+}
+
+void TarnReportingClientServerInstance::create(std::int64_t reporterID) {
+  log(LogLevel::Default, "creating session for reporter %lli", reporterID);
+  trace(kTraceCreate, reporterID);
+  sessions_.store(reporterID, makeSession(reporterID));
+  log(LogLevel::Default, "session created for reporter %lli", reporterID);
+}
+
+void TarnReportingClientServerInstance::retype(std::uint16_t serviceType, std::int64_t reporterID) {
+  log(LogLevel::Default, "setting service type %i for reporter %lli", serviceType, reporterID);
+  const auto type = static_cast<AudioServiceType>(serviceType);
+  const auto session = reporterID == 0 ? nullptr : findReportingSessionForID(reporterID, false);
+  if (session && session->serviceType() == type) {
+    session->setServiceType(type);
+  } else if (session) {
+    // A session's type is settled with its workers, so a change of type is a new session.
+    const auto replacement = makeSession(reporterID);
+    replacement->updateConfigurationWithContentsOfConfiguration(&session->configuration());
+    replacement->previousValues().merge(session->previousValues());
+    replacement->setServiceType(type);
+    sessions_.store(reporterID, replacement);
+  }
+  log(LogLevel::Default, "service type %i set for reporter  %lli", serviceType, reporterID);
+}
+
+void TarnReportingClientServerInstance::start(std::int64_t reporterID, platform::Acknowledge reply) {
+  log(LogLevel::Default, "starting session for reporter %lli", reporterID);
+  trace(kTraceStart, reporterID);
+  const auto session = reporterID == 0 ? nullptr : findReportingSessionForID(reporterID, false);
+  if (!session) {
+    reply(std::nullopt, true);
+    return;
+  }
+  if (session->started()) {
+    return;  // the reply of the first start stands for both
+  }
+  session->start();
+  sendHeldReply(*session);
+  session->transactionCompleteBlock() = std::move(reply);
+  if (session->serviceType() == AudioServiceType::Test && TarnReportingUtilityIsInternalBuild()) {
+    session->transactionCompleteBlock()(std::nullopt, true);  // test clients don't wait for the stop
+  }
+  logReportingSessions();
+}
+
+void TarnReportingClientServerInstance::stop(std::int64_t reporterID) {
+  log(LogLevel::Default, "stopping session for reporter %lli", reporterID);
+  trace(kTraceStop, reporterID);
+  if (reporterID == 0) {
+    return;
+  }
+  const auto session = findReportingSessionForID(reporterID, false);
+  if (session && session->started()) {
+    session->stop();
+    sendHeldReply(*session);
+    logReportingSessions();
+  } else {
+    log(
+        LogLevel::Error,
+        "Stop called, but session==nil or session.started==false. reporterID=%lli session=%@ session.started=%i",
+        reporterID, [&] { return session ? session->description() : std::string("(null)"); },
+        session && session->started());
+  }
+  log(LogLevel::Default, "stopping %lli", reporterID);
+}
+
+void TarnReportingClientServerInstance::destroy(std::int64_t reporterID) {
+  log(LogLevel::Default, "destroying session for reporter %lli", reporterID);
+  if (const auto session = sessions_.find(reporterID); session && session->started()) {
+    session->stop();
+  }
+  sessions_.remove(reporterID);
+  log(LogLevel::Default, "destroying %lli", reporterID);
+  logReportingSessions();
+}
+
+void TarnReportingClientServerInstance::send(const plist::Dictionary& message, std::uint32_t category,
+                                             std::uint16_t type, const platform::ReporterIDs& reporterIDs,
+                                             platform::Reply<>& reply) {
+  plist::Array storage;
+  log(LogLevel::Debug, "sending message for reporter %@", [&] { return textOf(reporterIDs, storage); });
+  trace(kTraceSend, processIdentifier_);
+  const auto service = delegate_.lock();
+  if (!service || !service->isReportingEnabled()) {
+    reply(platform::RemoteError{kErrorDomain, kReportingDisabled, "reporting is disabled"});
+    return;
+  }
+  for (const auto& session : service->findReportingSessionsForIDs(reporterIDs)) {
+    session->sendMessage(std::make_shared<TarnReportingSessionMessage>(
+        message, static_cast<AudioEventCategory>(category), static_cast<AudioEventType>(type)));
+  }
+  reply(std::nullopt);
+}
+
+void TarnReportingClientServerInstance::endClient() {
+  const auto service = delegate_.lock();
+  if (!service) {
+    return;
+  }
+  const auto& clients = service->getAllClients();
+  const bool isListed =
+      std::any_of(clients.begin(), clients.end(), [&](const auto& client) { return client.get() == this; });
+  if (!isListed) {
+    return;
+  }
+  sessions_.forEach([](std::int64_t, const std::shared_ptr<TarnReportingSession>& session) {
+    if (session->started()) {
+      session->stop();
+    }
+  });
+  sessions_.clear();
+  service->removeClient(*this);
+  log(LogLevel::Default, "removing %i from the server client list", processIdentifier_);
+}
+
+}  // namespace tarn

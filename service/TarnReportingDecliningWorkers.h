@@ -1,0 +1,125 @@
+// Worker classes that apply to no session of this build: their back-ends aren't there, so each declines every session.
+// They keep the table of worker classes whole: its order, what each class is and what it can do.
+#pragma once
+
+#include <memory>
+#include <string_view>
+
+#include "session/TarnReportingSessionWorker.h"
+
+namespace tarn {
+
+// The common part: never made, so the consumer's operation is never called.
+template <class Self>
+class TarnReportingDecliningWorker : public TarnReportingSessionWorkerProtocol {
+ public:
+  using TarnReportingSessionWorkerProtocol::TarnReportingSessionWorkerProtocol;
+  static std::unique_ptr<Self> initWithSession(const std::shared_ptr<TarnReportingSession>&) { return nullptr; }
+};
+
+template <class Self>
+class TarnReportingDecliningConsumer : public TarnReportingDecliningWorker<Self>,
+                                       public TarnReportingSessionWorkerConsumerProtocol {
+ public:
+  using TarnReportingDecliningWorker<Self>::TarnReportingDecliningWorker;
+  void handleMessage(const std::shared_ptr<TarnReportingSessionMessage>&) override {}
+};
+
+template <class Self>
+class TarnReportingDecliningProducer : public TarnReportingDecliningWorker<Self>,
+                                       public TarnReportingSessionWorkerProducerProtocol {
+ public:
+  using TarnReportingDecliningWorker<Self>::TarnReportingDecliningWorker;
+};
+
+class TarnReportingSessionTraceWorker : public TarnReportingDecliningWorker<TarnReportingSessionTraceWorker> {
+ public:
+  static constexpr std::string_view kClassName = "TarnReportingSessionTraceWorker";
+};
+
+class TarnReportingSessionVolumeMessagesWorker
+    : public TarnReportingDecliningProducer<TarnReportingSessionVolumeMessagesWorker> {
+ public:
+  static constexpr std::string_view kClassName = "TarnReportingSessionVolumeMessagesWorker";
+};
+
+class TarnReportingSessionLagoonMessagesWorker
+    : public TarnReportingDecliningProducer<TarnReportingSessionLagoonMessagesWorker> {
+ public:
+  static constexpr std::string_view kClassName = "TarnReportingSessionLagoonMessagesWorker";
+};
+
+class TarnReportingSessionInputMessagesWorker
+    : public TarnReportingDecliningProducer<TarnReportingSessionInputMessagesWorker> {
+ public:
+  static constexpr std::string_view kClassName = "TarnReportingSessionInputMessagesWorker";
+};
+
+class TarnReportingSessionWattlogWorker : public TarnReportingDecliningConsumer<TarnReportingSessionWattlogWorker> {
+ public:
+  static constexpr std::string_view kClassName = "TarnReportingSessionWattlogWorker";
+  static bool startOnInit() { return true; }
+  static bool handleSingleMessageSession() { return true; }
+};
+
+class TarnReportingSessionMemoryLogWorker : public TarnReportingDecliningConsumer<TarnReportingSessionMemoryLogWorker> {
+ public:
+  static constexpr std::string_view kClassName = "TarnReportingSessionMemoryLogWorker";
+  static bool startOnInit() { return true; }
+};
+
+class TarnReportingSessionPylonWorker : public TarnReportingDecliningConsumer<TarnReportingSessionPylonWorker> {
+ public:
+  static constexpr std::string_view kClassName = "TarnReportingSessionPylonWorker";
+  static bool startOnInit() { return true; }
+  static bool handleSingleMessageSession() { return true; }
+};
+
+class TarnReportingSessionDriverSnapshotWorker
+    : public TarnReportingDecliningProducer<TarnReportingSessionDriverSnapshotWorker> {
+ public:
+  static constexpr std::string_view kClassName = "TarnReportingSessionDriverSnapshotWorker";
+};
+
+class TarnReportingSessionSystemMonitorWorker
+    : public TarnReportingDecliningProducer<TarnReportingSessionSystemMonitorWorker> {
+ public:
+  static constexpr std::string_view kClassName = "TarnReportingSessionSystemMonitorWorker";
+};
+
+class TarnReportingSessionSnareWorker : public TarnReportingDecliningConsumer<TarnReportingSessionSnareWorker> {
+ public:
+  static constexpr std::string_view kClassName = "TarnReportingSessionSnareWorker";
+  static bool handleSingleMessageSession() { return true; }
+};
+
+class TarnReportingSessionDPWorker : public TarnReportingDecliningConsumer<TarnReportingSessionDPWorker> {
+ public:
+  static constexpr std::string_view kClassName = "TarnReportingSessionDPWorker";
+};
+
+class TarnReportingSessionSummaryJsonFileWorker
+    : public TarnReportingDecliningWorker<TarnReportingSessionSummaryJsonFileWorker> {
+ public:
+  static constexpr std::string_view kClassName = "TarnReportingSessionSummaryJsonFileWorker";
+};
+
+class TarnReportingSessionAudioRegistrationWorker
+    : public TarnReportingDecliningConsumer<TarnReportingSessionAudioRegistrationWorker> {
+ public:
+  static constexpr std::string_view kClassName = "TarnReportingSessionAudioRegistrationWorker";
+};
+
+class TarnReportingSessionRtcWorker : public TarnReportingDecliningConsumer<TarnReportingSessionRtcWorker> {
+ public:
+  static constexpr std::string_view kClassName = "TarnReportingSessionRtcWorker";
+  static bool handleSingleMessageSession() { return true; }
+};
+
+class TarnReportingSessionTattleWorker : public TarnReportingDecliningConsumer<TarnReportingSessionTattleWorker> {
+ public:
+  static constexpr std::string_view kClassName = "TarnReportingSessionTattleWorker";
+  static bool handleSingleMessageSession() { return true; }
+};
+
+}  // namespace tarn

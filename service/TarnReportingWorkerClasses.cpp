@@ -1,0 +1,38 @@
+#include "service/TarnReportingWorkerClasses.h"
+
+#include <algorithm>
+#include <array>
+
+#include "service/TarnReportingDecliningWorkers.h"
+#include "session/TarnReportingSessionSummaryWorker.h"
+#include "session/TarnReportingSessionTallyWorker.h"
+
+namespace tarn {
+
+namespace {
+
+template <class... Workers>
+constexpr std::array<TarnReportingSessionWorkerClass, sizeof...(Workers)> makeTable() {
+  return {TarnReportingSessionWorkerClass::of<Workers>()...};
+}
+
+constexpr auto kAllWorkerClasses = makeTable<
+    TarnReportingSessionTraceWorker, TarnReportingSessionVolumeMessagesWorker, TarnReportingSessionLagoonMessagesWorker,
+    TarnReportingSessionSummaryWorker, TarnReportingSessionInputMessagesWorker, TarnReportingSessionTallyWorker,
+    TarnReportingSessionWattlogWorker, TarnReportingSessionMemoryLogWorker, TarnReportingSessionPylonWorker,
+    TarnReportingSessionDriverSnapshotWorker, TarnReportingSessionSystemMonitorWorker, TarnReportingSessionSnareWorker,
+    TarnReportingSessionDPWorker, TarnReportingSessionSummaryJsonFileWorker,
+    TarnReportingSessionAudioRegistrationWorker, TarnReportingSessionRtcWorker, TarnReportingSessionTattleWorker>();
+
+static_assert(std::all_of(kAllWorkerClasses.begin(), kAllWorkerClasses.end(), [](const auto& row) {
+  return std::count_if(kAllWorkerClasses.begin(), kAllWorkerClasses.end(),
+                       [&](const auto& other) { return other.name == row.name; }) == 1;
+}));
+
+}  // namespace
+
+std::span<const TarnReportingSessionWorkerClass> TarnReportingWorkerClasses() {
+  return kAllWorkerClasses;
+}
+
+}  // namespace tarn

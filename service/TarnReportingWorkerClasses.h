@@ -1,0 +1,14 @@
+// The table of worker classes. Its order is the order in which a session makes its workers and, within consumers,
+// producers and the rest, starts and stops them.
+#pragma once
+
+#include <span>
+
+#include "session/TarnReportingSessionWorkerClass.h"
+
+namespace tarn {
+
+// All 17, in order. The table lives for ever. Threads: any.
+std::span<const TarnReportingSessionWorkerClass> TarnReportingWorkerClasses();
+
+}  // namespace tarn
