@@ -1,0 +1,54 @@
+// FakePlatform: a whole platform of fakes, installed for as long as it lives. A test's fixture holds one.
+//
+// At its end, work that never ran is destroyed while the facilities are still there, then they are taken away, and with
+// them every process-wide answer that was read from them; so one test leaves nothing to the next.
+#pragma once
+
+#include <chrono>
+
+#include "platform/Facilities.h"
+#include "platform/testing/FakeDefaultsStore.h"
+#include "platform/testing/FakeDeviceProperties.h"
+#include "platform/testing/FakeListener.h"
+#include "platform/testing/FakeNotificationCenter.h"
+#include "platform/testing/FakeProcessControl.h"
+#include "platform/testing/FakeProcessFacts.h"
+#include "platform/testing/FakeTallyService.h"
+#include "platform/testing/FakeTracePoints.h"
+#include "platform/testing/ManualClock.h"
+#include "platform/testing/ManualConditions.h"
+#include "platform/testing/ManualWorkQueues.h"
+#include "platform/testing/RecordingLog.h"
+
+namespace tarn::testing {
+
+class FakePlatform {
+ public:
+  FakePlatform();
+  ~FakePlatform();
+  FakePlatform(const FakePlatform&) = delete;
+  FakePlatform& operator=(const FakePlatform&) = delete;
+
+  // Runs due work of all queues until there is none.
+  void runUntilIdle() { workQueues.runUntilIdle(); }
+  // Moves the time on; work runs at the moment when it is due.
+  void advance(std::chrono::nanoseconds duration) { workQueues.advance(duration); }
+
+  ManualClock clock;
+  RecordingLog log;
+  ManualWorkQueues workQueues{clock};
+  ManualConditions conditions;
+  FakeTracePoints tracePoints;
+  FakeDeviceProperties deviceProperties;
+  FakeDefaultsStore defaults;
+  FakeNotificationCenter notifications;
+  FakeProcessFacts processFacts;
+  FakeProcessControl processControl;
+  FakeTallyService tally;
+  FakeListener listener;
+
+ private:
+  const platform::Facilities facilities_;
+};
+
+}  // namespace tarn::testing

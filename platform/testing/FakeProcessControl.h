@@ -1,0 +1,22 @@
+// FakeProcessControl: keeps the exit statuses asked for; the process goes on. Threads: one at a time.
+#pragma once
+
+#include <vector>
+
+#include "platform/ProcessControl.h"
+
+namespace tarn::testing {
+
+class FakeProcessControl final : public platform::ProcessControl {
+ public:
+  // The interface.
+  void exitProcess(int status) override { exitStatuses_.push_back(status); }
+
+  // Observations.
+  const std::vector<int>& exitStatuses() const noexcept { return exitStatuses_; }
+
+ private:
+  std::vector<int> exitStatuses_;
+};
+
+}  // namespace tarn::testing

@@ -1,0 +1,103 @@
+// ManualWorkQueues: serial queues that run when told, on the time of a ManualClock.
+//
+// All work of all queues runs on the thread that calls a run operation, in the order in which it was handed over. While
+// a piece of work runs, the run operations may be called again from inside it: work of the queues that are busy further
+// up stays where it is, work of the others runs. So a piece of work that waits for a back-end can let the back-end
+// work.
+//
+// Threads: work may be handed over on any thread; the run operations are for one thread at a time.
+#pragma once
+
+#include <chrono>
+#include <cstddef>
+#include <memory>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "platform/WorkQueue.h"
+
+namespace tarn::testing {
+
+class ManualClock;
+
+namespace detail {
+class ManualSchedule;
+}
+
+class ManualWorkQueue final : public platform::WorkQueue {
+ public:
+  ManualWorkQueue(std::shared_ptr<detail::ManualSchedule> schedule, std::size_t identifier, std::string name,
+                  platform::QualityOfService quality);
+
+  // The interface.
+  void async(platform::Work work) override;
+  void asyncAfter(std::chrono::nanoseconds delay, platform::Work work) override;
+  bool isCurrent() const noexcept override;
+  std::size_t waiting() const noexcept override;
+
+  // Controls.
+  // Runs the oldest piece of due work of this queue; whether there was one.
+  bool runOne();
+  // Runs due work of this queue until there is none; how many pieces ran.
+  std::size_t runUntilIdle();
+
+  // Observations.
+  const std::string& name() const noexcept { return name_; }
+  platform::QualityOfService quality() const noexcept { return quality_; }
+  // Pieces of work of this queue whose moment has not come.
+  std::size_t delayed() const;
+
+ private:
+  const std::shared_ptr<detail::ManualSchedule> schedule_;
+  const std::size_t identifier_;
+  const std::string name_;
+  const platform::QualityOfService quality_;
+};
+
+class ManualWorkQueues final : public platform::WorkQueues {
+ public:
+  // More pieces than this in one run are taken for an endless loop, and the process is ended.
+  static constexpr std::size_t kMostPiecesInOneRun = 50'000'000;
+
+  // The clock outlives the queues.
+  explicit ManualWorkQueues(ManualClock& clock);
+  ~ManualWorkQueues() override;
+  ManualWorkQueues(const ManualWorkQueues&) = delete;
+  ManualWorkQueues& operator=(const ManualWorkQueues&) = delete;
+
+  // The interface.
+  std::shared_ptr<platform::WorkQueue> makeSerialQueue(std::string_view name,
+                                                       platform::QualityOfService quality) override;
+
+  // Controls.
+  // Runs the oldest piece of due work of all queues; whether there was one.
+  bool runOne();
+  // Runs due work until there is none, what the work itself hands over included; how many pieces ran.
+  std::size_t runUntilIdle();
+  // Moves the clock on by `duration`, from moment to moment, and runs all work at the moment when it is due. Work that
+  // is due before the call runs first. How many pieces ran.
+  std::size_t advance(std::chrono::nanoseconds duration);
+  // Destroys all work uncalled, delayed work included.
+  void dropAll();
+
+  // Observations.
+  // The first queue made with this name that still lives; null when there is none.
+  std::shared_ptr<ManualWorkQueue> find(std::string_view name) const;
+  // The names of all queues that were made, in order.
+  std::vector<std::string> names() const;
+  // Pieces of due work of all queues, and pieces whose moment has not come.
+  std::size_t waiting() const;
+  std::size_t delayed() const;
+
+ private:
+  struct Made {
+    std::string name;
+    std::weak_ptr<ManualWorkQueue> queue;
+  };
+
+  const std::shared_ptr<detail::ManualSchedule> schedule_;
+  std::vector<Made> made_;
+};
+
+}  // namespace tarn::testing

@@ -1,0 +1,45 @@
+#include "service/TarnReportingPlatform.h"
+
+#include <cstdio>
+#include <cstdlib>
+#include <memory>
+
+#include "platform/Facilities.h"
+#include "service/TarnReportingInstallation.h"
+#include "service/TarnReportingLog.h"
+
+namespace tarn {
+
+namespace {
+
+// Not atomic: it changes only while no other thread uses the system.
+constinit std::unique_ptr<detail::Installation> standing;
+
+}  // namespace
+
+void TarnReportingInstallFacilities(const platform::Facilities* facilities) {
+  // The old answers go while their facilities can still be reached: letting go of a queue may run what it held.
+  if (standing != nullptr) {
+    standing->serverQueue.reset();
+  }
+  detail::installedLog = facilities == nullptr ? nullptr : &facilities->log;
+  standing = facilities == nullptr ? nullptr : std::make_unique<detail::Installation>(*facilities);
+}
+
+const platform::Facilities& TarnReportingFacilities() noexcept {
+  return detail::currentInstallation().facilities;
+}
+
+namespace detail {
+
+Installation& currentInstallation() noexcept {
+  if (standing == nullptr) {
+    std::fputs("tarnkit: the platform's facilities are not installed\n", stderr);
+    std::abort();
+  }
+  return *standing;
+}
+
+}  // namespace detail
+
+}  // namespace tarn
