@@ -1,0 +1,66 @@
+// TarnReportingSystemMonitorDictionary: the last state of each device setting that the system monitor watches, and who
+// wants to know when one changes.
+//
+// Owned by the system monitor; workers that observe it share it, so it may outlive the monitor. It is its own lock: all
+// access holds it, taken by the operations themselves, and a caller whose steps belong together takes it around them
+// (it may be taken again by who has it).
+//
+// Observers are called without the lock, on the thread that stored the state (the server queue), in the order in which
+// they were added. So an observer may send messages, ask this dictionary, and add or remove observers, itself included.
+// An observer that is removed on the server queue is not called any more; one that is removed on another thread may be
+// in a call at that moment. States are replaced, never removed. Threads: any.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <mutex>
+#include <vector>
+
+#include "platform/UniqueFunction.h"
+#include "plist/Dictionary.h"
+
+namespace tarn {
+
+class TarnReportingSystemMonitorDictionary {
+ public:
+  using Observer = platform::UniqueFunction<void(const plist::Key& feature)>;
+  enum class ObserverToken : std::uint64_t {};
+
+  TarnReportingSystemMonitorDictionary() = default;
+  TarnReportingSystemMonitorDictionary(const TarnReportingSystemMonitorDictionary&) = delete;
+  TarnReportingSystemMonitorDictionary& operator=(const TarnReportingSystemMonitorDictionary&) = delete;
+
+  void lock() const { mutex_.lock(); }
+  void unlock() const { mutex_.unlock(); }
+
+  // The last state of a feature: its value under its own name, "tarnreporting_timestamp" and "systemuptime_sec". Empty
+  // when it isn't known.
+  plist::Dictionary state(const plist::Key& feature) const;
+  // All of it: feature name to state.
+  plist::Dictionary states() const;
+
+  // Calls `observer` whenever a new state of the feature was stored; the state is then what state() gives. The observer
+  // holds whoever it serves weakly, and goes with removeObserver.
+  [[nodiscard]] ObserverToken addObserver(const plist::Key& feature, Observer observer);
+  // A token that is not known is let pass.
+  void removeObserver(ObserverToken token);
+
+  // For the monitor: stores a state without telling anybody, and tells the observers once the lock is released.
+  void store(const plist::Key& feature, const plist::Dictionary& state);
+  void notifyObservers(const plist::Key& feature);
+
+ private:
+  struct Observation {
+    ObserverToken token;
+    plist::Key feature;
+    Observer observer;
+    bool removed = false;
+  };
+
+  mutable std::recursive_mutex mutex_;  // guards all below, `removed` included
+  plist::Dictionary states_;
+  std::vector<std::shared_ptr<Observation>> observations_;
+  std::uint64_t lastToken_ = 0;
+};
+
+}  // namespace tarn
