@@ -1,0 +1,239 @@
+"""Tests of the checks in tools/lint: each rule passes what is right and reports what is wrong, and where."""
+
+import os
+import sys
+import unittest
+
+HERE = os.path.dirname(os.path.abspath(__file__))
+sys.path.insert(0, os.path.join(HERE, "..", "..", "tools", "lint"))
+
+import banned_calls  # noqa: E402
+import include_graph  # noqa: E402
+import sizes  # noqa: E402
+import wording  # noqa: E402
+from tree import Tree, code_only  # noqa: E402
+
+ONCE = "#pragma once\n"
+
+
+def found(check, files):
+    return [(finding.path, finding.line) for finding in check.check(Tree(files))]
+
+
+class CodeOnly(unittest.TestCase):
+    def test_comments_and_literals_become_blanks_and_lines_stay(self):
+        code = code_only('int a; // getenv("X")\n/* rand()\n rand() */ auto s = "printf(";\nauto c = \'"\';\nint d;\n')
+        self.assertEqual(code.count("\n"), 5)
+        for gone in ("getenv", "rand", "printf", '"'):
+            self.assertNotIn(gone, code)
+        self.assertIn("int d;", code)
+
+    def test_raw_strings_become_blanks(self):
+        self.assertNotIn("rand", code_only('auto s = R"x(rand() ")x";\n'))
+        self.assertIn("int d", code_only('auto s = R"(")";\nint d;\n'))
+
+    def test_digit_separators_are_no_literals(self):
+        self.assertIn("rand()", code_only("int a = 1'000; rand(); int b = 2'000;\n"))
+
+    def test_include_lines_stay_whole(self):
+        self.assertIn('"plist/Value.h"', code_only('#include "plist/Value.h"\n'))
+
+
+class IncludeGraph(unittest.TestCase):
+    def test_a_look_down_is_fine(self):
+        self.assertEqual(found(include_graph, {
+            "plist/Value.h": ONCE + "#include <string>\n",
+            "session/TarnReportingSession.h": ONCE + '#include "plist/Value.h"\n',
+        }), [])
+
+    def test_a_look_up_is_reported(self):
+        self.assertEqual(found(include_graph, {
+            "plist/Value.h": ONCE + '#include "session/TarnReportingSession.h"\n',
+            "session/TarnReportingSession.h": ONCE,
+        }), [("plist/Value.h", 2)])
+
+    def test_worker_families_do_not_know_each_other(self):
+        self.assertEqual(found(include_graph, {
+            "derived/Segment.h": ONCE,
+            "telemetry/Flush.cpp": '\n#include "derived/Segment.h"\n',
+        }), [("telemetry/Flush.cpp", 2)])
+
+    def test_every_row_of_the_table_keeps_plist_at_the_bottom(self):
+        for pattern, floor in include_graph.FLOORS:
+            if floor == "plist":
+                continue
+            path = pattern.replace("*.h", "Other.h").replace("*", "Other.h")
+            with self.subTest(path):
+                self.assertIn(("plist/Value.h", 2), found(include_graph, {
+                    "plist/Value.h": ONCE + f'#include "{path}"\n', path: ONCE}))
+
+    def test_only_the_table_of_classes_and_tests_include_a_concrete_worker(self):
+        worker = "derived/TarnReportingSessionVolumeWorker"
+        line = f'#include "{worker}.h"\n'
+        files = {f"{worker}.h": ONCE, f"{worker}.cpp": line}
+        for path in ("service/TarnReportingWorkerClasses.cpp", "tests/derived/VolumeTest.cpp"):
+            self.assertEqual(found(include_graph, {**files, path: line}), [])
+        for path in ("service/TarnReportingService.cpp", "service/main.cpp", "derived/Segment.cpp"):
+            self.assertEqual(found(include_graph, {**files, path: line}), [(path, 1)])
+
+    def test_worker_interfaces_are_not_concrete_workers(self):
+        self.assertEqual(found(include_graph, {
+            "session/TarnReportingSessionWorkerProtocol.h": ONCE,
+            "session/TarnReportingSession.cpp": '#include "session/TarnReportingSessionWorkerProtocol.h"\n',
+        }), [])
+
+    def test_third_party_headers_belong_beside_the_floors(self):
+        line = "#include <sqlite3.h>\n"
+        for path in ("plist/Json.cpp", "wire/Encoder.cpp", "client/Socket.cpp", "service/DataSerialize.cpp",
+                     "session/Log.cpp", "diagnostics/Pylon.cpp", "platform/testing/FakeClock.cpp"):
+            self.assertEqual(found(include_graph, {path: line}), [(path, 1)])
+        for path in ("platform/linux/HostLog.cpp", "platform/recorder/Database.cpp", "tools/ctl/Events.cpp",
+                     "tests/e2e/RunTest.cpp", "bench/Peers.cpp", "fuzz/FrameFuzzer.cpp"):
+            self.assertEqual(found(include_graph, {path: line}), [])
+
+    def test_sockets_are_for_the_client_alone(self):
+        line = "#include <sys/socket.h>\n"
+        self.assertEqual(found(include_graph, {"client/Socket.cpp": line}), [])
+        self.assertEqual(found(include_graph, {"wire/FrameBuffer.cpp": line}), [("wire/FrameBuffer.cpp", 1)])
+
+    def test_a_circle_is_reported(self):
+        self.assertEqual(found(include_graph, {
+            "wire/A.h": ONCE + '#include "wire/B.h"\n',
+            "wire/B.h": ONCE + '#include "wire/C.h"\n',
+            "wire/C.h": ONCE + '\n#include "wire/A.h"\n',
+        }), [("wire/C.h", 3)])
+
+    def test_two_roads_to_one_header_are_no_circle(self):
+        self.assertEqual(found(include_graph, {
+            "wire/A.h": ONCE + '#include "wire/B.h"\n#include "wire/C.h"\n',
+            "wire/B.h": ONCE + '#include "wire/C.h"\n',
+            "wire/C.h": ONCE,
+        }), [])
+
+    def test_a_path_that_is_not_from_the_root_is_reported(self):
+        self.assertEqual(found(include_graph, {"plist/Value.h": ONCE, "plist/Value.cpp": '#include "Value.h"\n'}),
+                         [("plist/Value.cpp", 1)])
+
+    def test_a_file_outside_the_plan_is_reported(self):
+        self.assertEqual(found(include_graph, {"misc/Odd.cpp": "int odd();\n"}), [("misc/Odd.cpp", 1)])
+
+    def test_conditional_code_is_reported_on_portable_floors_only(self):
+        text = "int a;\n#ifdef __linux__\n#endif\n"
+        self.assertEqual(found(include_graph, {"session/Log.cpp": text}), [("session/Log.cpp", 2)])
+        self.assertEqual(found(include_graph, {"platform/linux/Log.cpp": text}), [])
+
+    def test_a_header_without_pragma_once_is_reported(self):
+        self.assertEqual(found(include_graph, {"plist/Value.h": "int a();\n"}), [("plist/Value.h", 1)])
+
+
+class BannedCalls(unittest.TestCase):
+    BANNED = (
+        "std::this_thread::sleep_for(delay);", "::sleep(1);", "usleep(5);",
+        "auto t = std::chrono::steady_clock::now();", "auto t = std::chrono::system_clock::now();",
+        "auto t = time(nullptr);", "auto t = ::time(&now);", "clock_gettime(CLOCK_REALTIME, &now);",
+        "strftime(text, sizeof text, format, &parts);", "auto p = localtime(&now);",
+        'auto v = getenv("HOME");', 'auto v = std::getenv("HOME");', "std::ofstream out(path);",
+        "std::filesystem::remove(path);", 'auto f = fopen(path, "r");', "int d = ::open(path, flags);",
+        "int r = rand();", "int r = std::rand();", "std::random_device device;", "text = strerror(errno);",
+        "out << std::endl;", 'std::cout << "x";', 'printf("x");', 'std::fprintf(file, "x");',
+        'sprintf(text, "x");', "strcpy(a, b);", "int n = atoi(text);", "auto n = std::strtol(text, nullptr, 10);",
+        "auto* p = new Session();", "return new Session();", "delete p;", "delete[] p;", "auto p = malloc(5);",
+        "std::thread worker(run);", "auto f = std::async(run);", "exit(1);", "::_exit(1);", 'system("ls");',
+        "GTEST_SKIP();", "TEST(A, DISABLED_b) {}", "friend class SessionTest;", "FRIEND_TEST(Session, stops);",
+        "using namespace std;",
+    )
+    FINE = (
+        "double time() const;", "void exit(int status);", "clock.time();", "facilities.clock->time(now);",
+        "Session(const Session&) = delete;", "void operator delete(void* p);", "#include <new>\n",
+        "queue.sleep(5);", "renew(5);", "int brand(int a);", "platform::exit(1);", "auto n = newest;",
+        '// printf("x")\n', 'auto s = "getenv(";', "std::thread::id id;", "std::time_t t;", "Outcome open(Path path);",
+        "using namespace std::chrono_literals;", "friend class Iterator;", "runtime(nullptr);", "a.free(b);",
+    )
+
+    def test_each_banned_call_is_reported_on_its_line(self):
+        for call in self.BANNED:
+            with self.subTest(call):
+                self.assertIn(("session/A.cpp", 3), found(banned_calls, {"session/A.cpp": "\n\n  " + call + "\n"}))
+
+    def test_what_only_looks_alike_is_fine(self):
+        for text in self.FINE:
+            with self.subTest(text):
+                self.assertEqual(found(banned_calls, {"session/A.cpp": "  " + text + "\n"}), [])
+
+    def test_every_ban_is_tried(self):
+        code = [code_only(call) for call in self.BANNED]
+        for ban in banned_calls.BANS:
+            with self.subTest(ban.pattern):
+                self.assertTrue(any(ban.regex().search(call) for call in code))
+
+    def test_every_ban_names_a_substitute(self):
+        for ban in banned_calls.BANS:
+            self.assertTrue(ban.substitute.strip())
+
+    def test_tests_sleep_only_against_the_real_programs_or_under_stress(self):
+        text = "std::this_thread::sleep_for(delay);\n"
+        for path in ("tests/e2e/RunTest.cpp", "tests/wire/QueueStressTest.cpp"):
+            self.assertEqual(found(banned_calls, {path: text}), [])
+        for path in ("tests/session/SessionTest.cpp", "platform/linux/Loop.cpp"):
+            self.assertEqual(found(banned_calls, {path: text}), [(path, 1)])
+
+    def test_adapters_may_ask_the_clock(self):
+        text = "auto t = std::chrono::steady_clock::now();\n"
+        for path in ("platform/linux/HostClock.cpp", "platform/recorder/Writer.cpp", "client/Waiter.cpp"):
+            self.assertEqual(found(banned_calls, {path: text}), [])
+
+    def test_bare_new_is_for_the_packed_values_alone(self):
+        text = "auto* p = new Body;\n"
+        self.assertEqual(found(banned_calls, {"plist/Packed.cpp": text}), [])
+        self.assertEqual(found(banned_calls, {"platform/linux/Loop.cpp": text}), [("platform/linux/Loop.cpp", 1)])
+
+
+class Sizes(unittest.TestCase):
+    def test_files_at_their_limit_pass_and_one_line_more_does_not(self):
+        for path, limit in (("wire/A.h", 250), ("wire/A.cpp", 600), ("tests/wire/ATest.cpp", 800),
+                            ("tools/a.py", 400), ("dev", 400)):
+            with self.subTest(path):
+                self.assertEqual(found(sizes, {path: "\n" * limit}), [])
+                self.assertEqual(found(sizes, {path: "\n" * (limit + 1)}), [(path, limit + 1)])
+
+    def test_many_long_sources_are_reported(self):
+        long = "\n" * 401
+        self.assertEqual(found(sizes, {"wire/A.cpp": long}), [])
+        self.assertEqual(len(found(sizes, {"wire/A.cpp": long, "wire/B.cpp": long})), 2)
+        few = {f"wire/S{i}.cpp": "\n" for i in range(38)}
+        self.assertEqual(found(sizes, {**few, "wire/A.cpp": long, "wire/B.cpp": long}), [])
+
+    def test_wide_lines_of_texts_are_reported_but_tables_and_links_are_not(self):
+        self.assertEqual(found(sizes, {"docs/a.md": "x" * 120 + "\n" + "y" * 121 + "\n"}), [("docs/a.md", 2)])
+        self.assertEqual(found(sizes, {"docs/a.md": "|" + "x" * 130 + "|\n" + "https://" + "x" * 130 + "\n"}), [])
+
+
+class Wording(unittest.TestCase):
+    def test_paths_of_one_machine_are_reported(self):
+        for folder in wording.PRIVATE_ROOTS:
+            with self.subTest(folder):
+                self.assertEqual(found(wording, {"docs/a.md": f"see\n `/{folder}/anna/tarnkit`\n"}), [("docs/a.md", 2)])
+
+    def test_paths_of_any_machine_and_relative_ones_are_fine(self):
+        text = "/var/lib/tarnreporting /run/tarnreporting /usr/share\n./work/a x/home/b $XDG_STATE_HOME/data/x\n"
+        self.assertEqual(found(wording, {"docs/a.md": text}), [])
+
+    def test_notes_and_stray_bytes_are_reported(self):
+        for line in ("// TO" "DO later", "# FIX" "ME", "x ", "x\r", "\tx", "caf\udce9", "<" * 7 + " main"):
+            with self.subTest(line):
+                self.assertEqual(found(wording, {"wire/A.cpp": "x\n" + line + "\n"}), [("wire/A.cpp", 2)])
+
+    def test_a_last_line_without_newline_is_reported(self):
+        self.assertEqual(found(wording, {"docs/a.md": "a\nb"}), [("docs/a.md", 2)])
+
+
+class TreeOnDisk(unittest.TestCase):
+    def test_this_very_tree_is_found_and_build_is_not(self):
+        tree = Tree.at(os.path.join(HERE, "..", ".."))
+        self.assertIn("tests/lint/test_checks.py", tree.files)
+        self.assertIn("plist/Value.h", tree.cxx())
+        self.assertFalse([path for path in tree.files if path.startswith("build/")])
+
+
+if __name__ == "__main__":
+    unittest.main()
