@@ -1,0 +1,51 @@
+#include "session/TarnReportingSessionPreviousValues.h"
+
+#include <gtest/gtest.h>
+
+#include <random>
+
+namespace tarn {
+namespace {
+
+TEST(TarnReportingSessionPreviousValues, LatestValueOfAKeyWins) {
+  TarnReportingSessionPreviousValues values;
+  values.merge({{"a", 1}, {"b", 1}});
+  values.merge({{"b", 2}, {"c", 2}});
+  values.merge({{"a", 3}, {"b", 3}});
+  EXPECT_EQ(values.dictionary(), (plist::Dictionary{{"a", 3}, {"b", 3}, {"c", 2}}));
+  EXPECT_EQ(values.get("b").asInt64(), 3);
+  EXPECT_FALSE(values.get("d").present());
+  EXPECT_EQ(values.size(), 3U);
+}
+
+TEST(TarnReportingSessionPreviousValues, MergeOfAnotherSessionsValues) {
+  TarnReportingSessionPreviousValues old;
+  old.merge({{"a", 1}, {"b", 1}});
+  TarnReportingSessionPreviousValues values;
+  values.merge(old);
+  values.merge({{"b", 2}});
+  EXPECT_EQ(values.dictionary(), (plist::Dictionary{{"a", 1}, {"b", 2}}));
+}
+
+TEST(TarnReportingSessionPreviousValues, ManyShapesMergeAsOneByOne) {
+  const unsigned seed = std::random_device{}();
+  SCOPED_TRACE("seed " + std::to_string(seed));
+  std::mt19937 random(seed);
+  TarnReportingSessionPreviousValues values;
+  plist::Dictionary model;
+  for (int i = 0; i < 5000; ++i) {
+    plist::Dictionary payload;
+    for (std::size_t keys = random() % 4; keys > 0; --keys) {
+      payload.set(plist::Key("key" + std::to_string(random() % 12)), i);
+    }
+    values.merge(payload);
+    model.merge(payload);
+  }
+  EXPECT_EQ(values.dictionary(), model);
+  for (const auto& entry : model) {
+    EXPECT_EQ(values.get(entry.key), entry.value);
+  }
+}
+
+}  // namespace
+}  // namespace tarn
