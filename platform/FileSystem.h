@@ -1,0 +1,52 @@
+// FileSystem: the few files that the system writes and reads by itself. Paths are absolute.
+//
+// Threads: any; one open file is for one thread at a time. Calls take as long as the disk does.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <string>
+#include <string_view>
+
+#include "platform/Outcome.h"
+
+namespace tarn::platform {
+
+// A file that is open for writing. Destroying it closes it and drops the result.
+class WritableFile {
+ public:
+  virtual ~WritableFile() = default;
+  // Appends the bytes. Some may be held back until close(), so an error may belong to an earlier write; what reached
+  // the file before stays there.
+  [[nodiscard]] virtual MaybeError write(std::string_view bytes) = 0;
+  // Writes what is held back and closes. The file is closed afterwards, whatever the result; later calls fail.
+  [[nodiscard]] virtual MaybeError close() = 0;
+};
+
+enum class WellKnownDirectory {
+  DiagnosticLogs,  // the device user's diagnostic logs; its last component is "DiagnosticLogs"
+  Temporary,       // this process's own files that nobody needs after it
+};
+
+class FileSystem {
+ public:
+  virtual ~FileSystem() = default;
+  // The directory's path, without a slash at its end. It need not exist yet.
+  virtual std::string wellKnownDirectory(WellKnownDirectory which) const = 0;
+  // Makes the directory and what is missing above it, each with these permissions less the process's mask. One that is
+  // there already is left as it is, and that is a success.
+  [[nodiscard]] virtual MaybeError createDirectories(std::string_view path, std::uint32_t permissions) = 0;
+  // Makes an empty file; fails when there is something at the path.
+  [[nodiscard]] virtual MaybeError createFile(std::string_view path) = 0;
+  // Opens a file that exists, and empties it.
+  virtual Outcome<std::unique_ptr<WritableFile>> openForWriting(std::string_view path) = 0;
+  // The whole content of a file; fails when it is larger than `mostBytes`.
+  virtual Outcome<std::string> readFile(std::string_view path, std::size_t mostBytes) = 0;
+  // Whether there is something at the path; false also when that can't be found out.
+  virtual bool exists(std::string_view path) const = 0;
+  // Moves a file, onto another file system too, replacing what is there; never leaves half a file at `to`.
+  [[nodiscard]] virtual MaybeError moveFile(std::string_view from, std::string_view to) = 0;
+};
+
+}  // namespace tarn::platform

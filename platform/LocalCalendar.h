@@ -1,0 +1,33 @@
+// LocalCalendar: moments in the device's time zone, on the Gregorian calendar. Threads: any.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <string_view>
+
+namespace tarn::platform {
+
+struct LocalTime {
+  std::int64_t year = 1970;
+  int month = 1;             // 1 to 12
+  int day = 1;               // 1 to 31
+  int hour = 0;              // 0 to 23
+  int minute = 0;            // 0 to 59
+  int second = 0;            // 0 to 59
+  int dayOfWeek = 4;         // 0 is Sunday
+  int dayOfYear = 0;         // 0 is the first of January
+  int secondsEastOfUtc = 0;  // at that moment, summer time included
+};
+
+class LocalCalendar {
+ public:
+  virtual ~LocalCalendar() = default;
+  // The moment as the device's clocks showed it; fractions of a second are cut off toward the past. Moments beyond the
+  // years 1 to 9999 count as the nearest of these.
+  virtual LocalTime localTime(double epochSeconds) const = 0;
+  // The moment written by a pattern: yyyy, MM, dd, HH, mm, ss (digits with leading zeros) and Z (the offset from UTC as
+  // +0100); every other character stands for itself. "yyyyMMdd-HHmmssZ" gives 20240131-142501+0100.
+  virtual std::string format(double epochSeconds, std::string_view pattern) const = 0;
+};
+
+}  // namespace tarn::platform

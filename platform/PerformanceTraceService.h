@@ -1,0 +1,52 @@
+// PerformanceTraceService: records a trace of the device's performance into a file.
+//
+// Life of a trace: start, performanceTraceDidStart, ... stop, performanceTraceDidStop, performanceTraceDidComplete with
+// the place of the file. The callbacks come on a thread of the facility's own, in this order; after a callback with an
+// error no other follows.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <string>
+
+#include "platform/Outcome.h"
+
+namespace tarn::platform {
+
+struct PerformanceTraceConfiguration {
+  std::int32_t templateNumber = 2;
+  bool compressWhenFinished = true;
+};
+
+class PerformanceTraceDelegate {
+ public:
+  virtual ~PerformanceTraceDelegate() = default;
+  virtual void performanceTraceDidStart(const MaybeError& error) = 0;
+  virtual void performanceTraceDidStop(const MaybeError& error) = 0;
+  // Beside an error the location is empty. The token is the facility's own name for the trace.
+  virtual void performanceTraceDidComplete(const std::string& location, const std::string& token,
+                                           const MaybeError& error) = 0;
+};
+
+class PerformanceTraceSession {
+ public:
+  virtual ~PerformanceTraceSession() = default;
+  // Set before start(); an empty pointer takes it away. Threads: any, also within a callback.
+  virtual void setDelegate(std::weak_ptr<PerformanceTraceDelegate> delegate) = 0;
+  // Both return at once.
+  virtual void startTrace() = 0;
+  virtual void stopTrace() = 0;
+  // Whether there is a trace that can be stopped.
+  virtual bool isValid() const = 0;
+};
+
+class PerformanceTraceService {
+ public:
+  virtual ~PerformanceTraceService() = default;
+  // A new session; a null pointer when the configuration is not supported. Letting go of it ends its trace without more
+  // callbacks.
+  virtual std::shared_ptr<PerformanceTraceSession> createSession(
+      const PerformanceTraceConfiguration& configuration) = 0;
+};
+
+}  // namespace tarn::platform

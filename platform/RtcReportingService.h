@@ -1,0 +1,68 @@
+// RtcReportingService: the service that gathers telemetry sessions of real-time communication from many processes.
+//
+// Threads: the calls of one session come one at a time, from any thread; the start's completion comes on a thread of
+// the service's own, at any time, also when whoever asked is gone.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "platform/Outcome.h"
+#include "platform/UniqueFunction.h"
+#include "plist/Dictionary.h"
+
+namespace tarn::platform {
+
+struct RtcSessionInfoKeys {
+  static constexpr std::string_view kClientType = "clientType";
+  static constexpr std::string_view kClientVersion = "clientVersion";
+  static constexpr std::string_view kSessionID = "sessionID";
+  static constexpr std::string_view kBatchEvent = "batchEvent";
+  static constexpr std::string_view kHierarchyToken = "hierarchyToken";
+  static constexpr std::string_view kContainsRealtimeEvents = "containsRealtimeEvents";
+  static constexpr std::string_view kClientBundleID = "clientBundleID";
+};
+
+struct RtcUserInfoKeys {
+  static constexpr std::string_view kClientName = "clientName";
+  static constexpr std::string_view kServiceName = "serviceName";
+};
+
+// A session in the service. Letting go of it ends it there.
+class RtcReportingSession {
+ public:
+  // The names of the available backends (maybe none of them), or no list at all.
+  using StartCompletion = UniqueFunction<void(const std::optional<std::vector<std::string>>& backends)>;
+  struct SendResult {
+    bool sent = false;
+    MaybeError error{};  // a message may fail without one
+  };
+
+  virtual ~RtcReportingSession() = default;
+  // Looks for backends. A well-behaved service completes once; a handler must bear more calls and none.
+  virtual void startConfiguration(StartCompletion completion) = 0;
+  // The payload is taken as it is now.
+  [[nodiscard]] virtual SendResult sendMessage(std::uint16_t category, std::uint16_t type,
+                                               const plist::Dictionary& payload) = 0;
+  // Pushes out events that are held back for batching.
+  virtual void flushMessages() = 0;
+  // For log lines.
+  virtual std::string description() const = 0;
+};
+
+class RtcReportingService {
+ public:
+  virtual ~RtcReportingService() = default;
+  // A token for a new place below `parentToken`, or at the top without one. Nothing when none is handed out.
+  virtual std::optional<std::string> newHierarchyToken(const std::optional<std::string>& parentToken) = 0;
+  // A new session; `frameworksToCheck` may be none. A null pointer when it can't be made.
+  virtual std::shared_ptr<RtcReportingSession> createSession(
+      const plist::Dictionary& sessionInfo, const plist::Dictionary& userInfo,
+      const std::optional<std::vector<std::string>>& frameworksToCheck) = 0;
+};
+
+}  // namespace tarn::platform
