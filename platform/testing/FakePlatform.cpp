@@ -5,12 +5,41 @@
 namespace tarn::testing {
 
 FakePlatform::FakePlatform()
-    : facilities_{clock,         workQueues,   conditions,     log,  tracePoints, deviceProperties, defaults,
-                  notifications, processFacts, processControl, tally} {
+    : facilities_{clock,
+                  workQueues,
+                  conditions,
+                  log,
+                  tracePoints,
+                  deviceProperties,
+                  defaults,
+                  notifications,
+                  processFacts,
+                  processControl,
+                  tally,
+                  fileSystem,
+                  localCalendar,
+                  randomSource,
+                  processEnvironment,
+                  commandRunner,
+                  &wattlog,
+                  &pylon,
+                  &snare,
+                  &tattle,
+                  &gyre,
+                  &flume,
+                  &rtcReporting,
+                  &performanceTrace,
+                  &traceAnalysis,
+                  &perfDataWriters,
+                  &accessories} {
   TarnReportingInstallFacilities(&facilities_);
 }
 
 FakePlatform::~FakePlatform() {
+  for (auto* replies :
+       {&snare.replies(), &tattle.replies(), &rtcReporting.completions(), &performanceTrace.callbacks()}) {
+    replies->dropAll();
+  }
   workQueues.dropAll();
   TarnReportingInstallFacilities(nullptr);
 }
