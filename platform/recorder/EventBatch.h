@@ -1,0 +1,49 @@
+// EventBatch: events in the order of their hand-over, as the clients' thread leaves them for the writer.
+//
+// Which problem: handing an event over must cost next to nothing. Dictionaries come by reference count and the names
+// lie one behind the other in one text, so once a batch has grown to its usual size an event allocates nothing. Owner:
+// the recorder, which swaps two of them. Threads: one at a time.
+#pragma once
+
+#include <cstddef>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "plist/Dictionary.h"
+
+namespace tarn::recorder {
+
+class EventBatch {
+ public:
+  struct Event {
+    std::string_view backend;  // a text that lives for ever
+    double time;               // epoch seconds
+    std::size_t nameAt;        // where the name begins in the names
+    std::size_t nameSize;
+    std::size_t bytes;  // what the event is counted for
+    plist::Dictionary payload;
+    plist::Dictionary detail;
+  };
+
+  // Adds an event; returns the bytes that it is counted for. A payload shared with the event before costs nothing anew.
+  std::size_t add(std::string_view backend, std::string_view name, plist::Dictionary payload, plist::Dictionary detail,
+                  double time);
+  void clear() noexcept;
+  void swap(EventBatch& other) noexcept;
+
+  bool empty() const noexcept { return events_.empty(); }
+  std::size_t size() const noexcept { return events_.size(); }
+  std::size_t bytes() const noexcept { return bytes_; }
+  const Event& operator[](std::size_t index) const noexcept { return events_[index]; }
+  std::string_view name(const Event& event) const noexcept {
+    return std::string_view(names_).substr(event.nameAt, event.nameSize);
+  }
+
+ private:
+  std::vector<Event> events_;
+  std::string names_;
+  std::size_t bytes_ = 0;
+};
+
+}  // namespace tarn::recorder

@@ -1,0 +1,47 @@
+// Statement: one prepared SQLite statement. Owner: whoever owns the connection, which must outlive it. Threads: those
+// of the connection.
+//
+// Operations that can fail answer SQLite's result code; the text of a failure is the connection's.
+#pragma once
+
+#include <cstdint>
+#include <string_view>
+
+struct sqlite3;
+struct sqlite3_stmt;
+
+namespace tarn::recorder {
+
+class Statement {
+ public:
+  Statement() = default;
+  ~Statement() { finalize(); }
+  Statement(const Statement&) = delete;
+  Statement& operator=(const Statement&) = delete;
+
+  // Prepares the text, in place of an earlier one.
+  [[nodiscard]] int prepare(sqlite3* database, std::string_view sql, bool kept = false);
+  void finalize() noexcept;
+
+  // Places count from 1. A text is not copied: it must live until the statement is reset.
+  Statement& bind(int place, std::int64_t value) noexcept;
+  Statement& bind(int place, double value) noexcept;
+  Statement& bind(int place, std::string_view text) noexcept;
+
+  // One step: SQLITE_ROW, SQLITE_DONE or what went wrong.
+  [[nodiscard]] int step() noexcept;
+  void reset() noexcept;
+  // Runs to the end and resets: SQLITE_OK or what went wrong. Rows are passed over.
+  [[nodiscard]] int run() noexcept;
+
+  // Columns count from 0. A text lives until the next step.
+  bool isNull(int column) const noexcept;
+  std::int64_t integer(int column) const noexcept;
+  double real(int column) const noexcept;
+  std::string_view text(int column) const noexcept;
+
+ private:
+  sqlite3_stmt* statement_ = nullptr;
+};
+
+}  // namespace tarn::recorder
