@@ -1,0 +1,52 @@
+// Encoder: appends frames to a growing buffer that the owner writes out and clears when it likes.
+//
+// What it writes is canonical: the shortest integers and lengths, definite lengths, a float as 32 and a double as 64
+// bits, a date as tag 1 over an integer when it has no fraction and over a double else, containers in their own order.
+//
+// Owned with its buffer by one connection. Threads: one at a time.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <initializer_list>
+#include <span>
+#include <string>
+#include <string_view>
+
+#include "plist/ValueView.h"
+#include "wire/Request.h"
+
+namespace tarn::wire {
+
+// Appends the CBOR of one value. An absent value is written as null, which no property list holds; for arguments only.
+void appendValue(std::string& out, const plist::ValueView& value);
+
+class Encoder {
+ public:
+  // Writes behind what `out` holds. `out` must outlive the encoder.
+  explicit Encoder(std::string& out) noexcept : out_(out) {}
+  Encoder(const Encoder&) = delete;
+  Encoder& operator=(const Encoder&) = delete;
+
+  // One frame each: a request of any operation ...
+  void request(std::uint64_t id, const Request& request);
+  // ... or the most frequent one without a Request around it; `reporterIDs` null stands for none.
+  void sendMessage(std::uint64_t id, const plist::Dictionary& message, std::uint32_t category, std::uint16_t type,
+                   const std::span<const std::int64_t>* reporterIDs);
+
+  // One frame each: [id, null, results...] and [id, [domain, code, text]].
+  void reply(std::uint64_t id, std::initializer_list<plist::ValueView> results = {});
+  // The result is one array of these numbers.
+  void replyWithNumbers(std::uint64_t id, std::span<const std::int64_t> numbers);
+  // A text that isn't UTF-8 is mended: each wrong byte becomes U+FFFD.
+  void errorReply(std::uint64_t id, std::string_view domain, std::int64_t code, std::string_view text);
+
+ private:
+  // Makes room for the length and returns where it stands; endFrame fills it in.
+  std::size_t beginFrame();
+  void endFrame(std::size_t header);
+
+  std::string& out_;
+};
+
+}  // namespace tarn::wire

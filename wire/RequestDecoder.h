@@ -1,0 +1,54 @@
+// RequestDecoder: turns one frame into a checked request. The border between untrusted clients and the service: what
+// comes out of here needs no further checks.
+//
+// A good frame is decoded in one pass. Only when that pass meets trouble is the frame looked at again, to tell a frame
+// that can be answered with an error from one that can't be read at all:
+//
+//   not one whole well-formed CBOR array, bytes behind it, no unsigned id    Unreadable: close the connection
+//   unknown operation; wrong count, kind or range of an argument; something
+//   inside a dictionary argument that is no property list                    Refused: answer with the error, go on
+//
+// Lengths that are left open (indefinite) make a frame no less whole; inside a dictionary argument they are refused.
+// Nesting deeper than a property list may have costs no stack, and memory of at most twice the frame.
+//
+// One decoder can serve all connections of a thread: it keeps nothing between frames but scratch space and the key
+// lists seen lately. Threads: one at a time. Throws nothing.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <span>
+#include <string>
+
+#include "plist/PackedBuilder.h"
+#include "wire/Request.h"
+
+namespace tarn::wire {
+
+enum class DecodeOutcome {
+  Ok,
+  Refused,     // the id is known, the refusal says what to answer
+  Unreadable,  // the refusal's text says why
+};
+
+struct Refusal {
+  ErrorCode code = ErrorCode::BadArguments;
+  std::string text;
+};
+
+class RequestDecoder {
+ public:
+  RequestDecoder() = default;
+  RequestDecoder(const RequestDecoder&) = delete;
+  RequestDecoder& operator=(const RequestDecoder&) = delete;
+
+  // `request` is whole when the outcome is Ok; its id also counts when it is Refused. `refusal` is filled in otherwise.
+  // Members that the operation doesn't have are left at their defaults.
+  DecodeOutcome decode(std::span<const std::byte> frame, DecodedRequest& request, Refusal& refusal);
+
+ private:
+  plist::PackedBuilder builder_;
+  plist::KeyListCache keyLists_;
+};
+
+}  // namespace tarn::wire
