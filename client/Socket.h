@@ -1,0 +1,39 @@
+// Socket: a connected Unix-domain stream socket, closed with its owner. Threads: one at a time.
+#pragma once
+
+#include <chrono>
+#include <cstddef>
+#include <optional>
+#include <span>
+#include <string>
+#include <string_view>
+
+namespace tarn::client {
+
+class Socket {
+ public:
+  Socket() noexcept = default;
+  explicit Socket(int fd) noexcept : fd_(fd) {}
+  Socket(Socket&& other) noexcept : fd_(other.fd_) { other.fd_ = -1; }
+  Socket& operator=(Socket&& other) noexcept;
+  ~Socket() { close(); }
+
+  // Connects to the socket at `path`. On failure the socket isn't open, `errorNumber` and `error` say why.
+  static Socket connect(const std::string& path, int& errorNumber, std::string& error);
+
+  int fd() const noexcept { return fd_; }
+  bool open() const noexcept { return fd_ >= 0; }
+  void close() noexcept;
+
+  // Bytes moved: more than 0, 0 when nothing can be moved now, -1 when the connection is over. Neither raises SIGPIPE;
+  // sending never waits, receiving waits for the first byte when told to.
+  std::ptrdiff_t sendSome(std::string_view bytes) noexcept;
+  std::ptrdiff_t receiveSome(std::span<std::byte> space, bool mayWait) noexcept;
+  // Waits until the socket can be read or, when asked, written; nothing means for ever. False when the time is over.
+  bool waitUntilReady(bool forWriting, std::optional<std::chrono::milliseconds> timeout) const noexcept;
+
+ private:
+  int fd_ = -1;
+};
+
+}  // namespace tarn::client

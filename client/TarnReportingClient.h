@@ -1,0 +1,152 @@
+// TarnReportingClient: one connection to the reporting service.
+//
+// The owner drives it: there is no thread inside, a reply is read by whoever waits for it. So a call costs one write
+// and one read and no hand-over between threads, and an owner with an event loop watches fd() and calls dispatch().
+//
+//   call()              write, then read until that reply is there; other replies are delivered on the way
+//   send(), trySend()   append to the outgoing buffer; written by flush(), or once autoFlushBytes have gathered
+//   dispatch(), wait()  write what can be written, read what is there, deliver
+//
+// Handlers run on the owner's thread, inside call, send, flush, dispatch, wait and close, never inside trySend. A
+// handler may send, trySend and close; inside a handler send doesn't wait either. It may not call, flush, dispatch,
+// wait or destroy the client: that, like use by two threads at once, ends the process with a message. Different threads
+// may use one client in turn.
+//
+// Every request that was sent has its handler called exactly once: with the reply, with ConnectionLost when the
+// connection ends (then the lost handler is called once, after them), or with Cancelled at close(). A start's reply is
+// held by the service until the session stops; when it can never come (the session was destroyed, replaced or retyped,
+// or was running already) the handler gets Cancelled. SIGPIPE is never raised. Connecting anew is the owner's choice.
+#pragma once
+
+#include <chrono>
+#include <cstddef>
+#include <cstdint>
+#include <deque>
+#include <functional>
+#include <future>
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "client/OwnerCheck.h"
+#include "client/PendingReplies.h"
+#include "client/Reply.h"
+#include "client/Requests.h"
+#include "client/Socket.h"
+#include "wire/FrameBuffer.h"
+#include "wire/ReplyDecoder.h"
+
+namespace tarn::client {
+
+struct Options {
+  std::size_t maxFrameBytes = wire::kDefaultMaxFrameBytes;  // longer requests aren't sent: the service would cut us off
+  std::size_t maxReplyBytes = std::size_t{64} << 20U;       // a longer reply ends the connection
+  std::size_t maxOutgoingBytes = std::size_t{4} << 20U;     // beyond: send waits, trySend says Full
+  std::size_t maxOutstanding = 65536;                       // likewise; starts that are held have a count of their own
+  std::size_t autoFlushBytes = 65536;                       // 0: every send is a write of its own
+};
+
+enum class SendStatus : std::uint8_t {
+  Sent,          // the handler will be called
+  Full,          // a bound is reached; try again after dispatch() or wait()
+  TooLarge,      // longer than a frame may be
+  NotConnected,  // the connection has ended
+};
+
+class TarnReportingClient {
+ public:
+  using Milliseconds = std::chrono::milliseconds;
+  using LostHandler = std::function<void(const std::string& why)>;
+
+  struct Connected {
+    std::unique_ptr<TarnReportingClient> client;  // null on failure
+    int errorNumber = 0;                          // of the system call that failed
+    std::string error;                            // what failed, with the path
+  };
+  // Connects to the service's socket. Doesn't wait beyond what the kernel does.
+  static Connected connect(const std::string& path, const Options& options);
+  static Connected connect(const std::string& path) { return connect(path, Options()); }
+
+  // Takes over a connected stream socket.
+  TarnReportingClient(Socket socket, const Options& options);
+  // Closes.
+  ~TarnReportingClient();
+  TarnReportingClient(const TarnReportingClient&) = delete;
+  TarnReportingClient& operator=(const TarnReportingClient&) = delete;
+
+  void setLostHandler(LostHandler handler);
+
+  // Sends and waits for the reply, at most so long. Everything sent before is written first.
+  Reply call(const Request& request, std::optional<Milliseconds> timeout = std::nullopt);
+  // Sends; where a bound is reached waits until the service has taken or answered enough. Not Sent: the handler is
+  // never called.
+  SendStatus send(const Request& request, ReplyHandler handler = {});
+  // Never waits and never reads. What it allocates is bounded by the options.
+  SendStatus trySend(const Request& request, ReplyHandler handler = {});
+  // The reply as a future, which becomes ready while the owner drives the client.
+  std::future<Reply> sendForFuture(const Request& request);
+
+  // Writes everything that is waiting; reads and delivers replies while the service doesn't take it. False when the
+  // connection is lost.
+  bool flush();
+  // Writes and reads what can be without waiting. Returns how many handlers were called.
+  std::size_t dispatch();
+  // Waits until there is something to write or read, at most so long, then does what dispatch does.
+  std::size_t wait(Milliseconds timeout);
+
+  // For poll(): readable always matters, writable while wantsToWrite(). -1 once the connection is over.
+  int fd() const noexcept { return socket_.fd(); }
+  bool wantsToWrite() const noexcept { return outgoing_.size() > written_; }
+  bool connected() const noexcept { return socket_.open(); }
+  // Requests whose handlers are still to be called, held starts included.
+  std::size_t outstanding() const noexcept { return pending_.size(); }
+  // Replies that nobody waited for, and were dropped.
+  std::uint64_t unmatchedReplies() const noexcept { return unmatchedReplies_; }
+
+  // Ends the connection. What is still outgoing is not written: flush() first. Outstanding requests are Cancelled.
+  void close();
+
+  // The remote operations, each waiting for its reply. (A start is sent: its reply comes with the stop.)
+  Reply createReportingSession(std::int64_t reporterID);
+  Reply setServiceType(std::uint16_t serviceType, std::int64_t reporterID);
+  Reply getServiceNameForReporterID(std::int64_t reporterID);
+  Reply setConfiguration(const plist::Dictionary& configuration, std::int64_t reporterID);
+  SendStatus startReportingSessionForID(std::int64_t reporterID, ReplyHandler handler = {});
+  Reply sendMessage(const plist::Dictionary& message, std::uint32_t category, std::uint16_t type,
+                    std::optional<std::vector<std::int64_t>> reporterIDs = std::nullopt);
+  Reply stopReportingSessionForID(std::int64_t reporterID);
+  Reply destroyReportingSession(std::int64_t reporterID);
+  Reply reporterID(std::int64_t reporterID);
+  Reply getAllReporters();
+  Reply killService();
+  Reply status();
+
+ private:
+  SendStatus append(const Request& request, ReplyHandler handler);
+  bool hasRoom(const Request& request) const noexcept;
+  void writeSome();
+  void readSome(bool mayWait);
+  void takeFrames();
+  std::size_t exchange(Milliseconds timeout);
+  bool waitForSocket(std::optional<Milliseconds> timeout);
+  std::size_t deliverReady();
+  void deliver(const ReplyHandler& handler, Reply&& reply);
+  void lose(const std::string& why);
+
+  const Options options_;
+  Socket socket_;
+  wire::FrameBuffer frames_;
+  wire::ReplyDecoder decoder_;
+  PendingReplies pending_;
+  std::string outgoing_;
+  std::size_t written_ = 0;  // of outgoing_
+  std::uint64_t nextID_ = 1;
+  std::uint64_t unmatchedReplies_ = 0;
+  std::size_t delivered_ = 0;
+  bool delivering_ = false;
+  LostHandler lostHandler_;
+  mutable OwnerCheck owner_;
+};
+
+}  // namespace tarn::client
