@@ -21,7 +21,6 @@
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
-#include <deque>
 #include <functional>
 #include <future>
 #include <memory>
@@ -123,16 +122,24 @@ class TarnReportingClient {
   Reply status();
 
  private:
-  SendStatus append(const Request& request, ReplyHandler handler);
-  bool hasRoom(const Request& request) const noexcept;
+  using Clock = std::chrono::steady_clock;
+  using Deadline = std::optional<Clock::time_point>;
+  // How the connection ended, until every handler has heard of it.
+  enum class Ending : std::uint8_t { None, Lost, Closed };
+
+  SendStatus append(const Request& request, ReplyHandler& handler);
+  SendStatus sendWithRoom(const Request& request, ReplyHandler& handler);
+  bool countsAreFull(const Request& request) const noexcept;
   void writeSome();
   void readSome(bool mayWait);
   void takeFrames();
-  std::size_t exchange(Milliseconds timeout);
-  bool waitForSocket(std::optional<Milliseconds> timeout);
-  std::size_t deliverReady();
+  void takeReply(wire::DecodedReply& decoded);
+  void exchange(const Deadline& deadline);
   void deliver(const ReplyHandler& handler, Reply&& reply);
-  void lose(const std::string& why);
+  void deliverCancelled();
+  void deliverLeftOvers();
+  void lose(std::string why);
+  void mustBeOutsideHandlers(const char* operation) const noexcept;
 
   const Options options_;
   Socket socket_;
@@ -140,13 +147,16 @@ class TarnReportingClient {
   wire::ReplyDecoder decoder_;
   PendingReplies pending_;
   std::string outgoing_;
-  std::size_t written_ = 0;  // of outgoing_
+  std::size_t written_ = 0;   // of outgoing_
+  bool writeBroken_ = false;  // the peer takes nothing more; what it sent before is still read
   std::uint64_t nextID_ = 1;
   std::uint64_t unmatchedReplies_ = 0;
   std::size_t delivered_ = 0;
   bool delivering_ = false;
+  Ending ending_ = Ending::None;
+  std::string lostWhy_;
   LostHandler lostHandler_;
-  mutable OwnerCheck owner_;
+  OwnerCheck owner_;
 };
 
 }  // namespace tarn::client

@@ -28,12 +28,8 @@ class Encoder {
   Encoder(const Encoder&) = delete;
   Encoder& operator=(const Encoder&) = delete;
 
-  // One frame each: a request of any operation ...
+  // One frame: a request of any operation.
   void request(std::uint64_t id, const Request& request);
-  // ... or the most frequent one without a Request around it; `reporterIDs` null stands for none.
-  void sendMessage(std::uint64_t id, const plist::Dictionary& message, std::uint32_t category, std::uint16_t type,
-                   const std::span<const std::int64_t>* reporterIDs);
-
   // One frame each: [id, null, results...] and [id, [domain, code, text]].
   void reply(std::uint64_t id, std::initializer_list<plist::ValueView> results = {});
   // The result is one array of these numbers.

@@ -9,7 +9,7 @@
 //   inside a dictionary argument that is no property list                    Refused: answer with the error, go on
 //
 // Lengths that are left open (indefinite) make a frame no less whole; inside a dictionary argument they are refused.
-// Nesting deeper than a property list may have costs no stack, and memory of at most twice the frame.
+// Nesting deeper than a property list may have costs no stack, and little more memory than the frame itself.
 //
 // One decoder can serve all connections of a thread: it keeps nothing between frames but scratch space and the key
 // lists seen lately. Threads: one at a time. Throws nothing.

@@ -1,0 +1,326 @@
+#include "client/TarnReportingClient.h"
+
+#include <algorithm>
+#include <utility>
+
+#include "wire/Encoder.h"
+
+namespace tarn::client {
+
+namespace {
+
+Reply failure(Outcome outcome, std::string text) {
+  Reply reply;
+  reply.outcome = outcome;
+  reply.error.text = std::move(text);
+  return reply;
+}
+
+Reply notSent(SendStatus status) {
+  switch (status) {
+    case SendStatus::Full:
+      return failure(Outcome::Full, "too many requests are outstanding");
+    case SendStatus::TooLarge:
+      return failure(Outcome::TooLarge, "the request is longer than a frame may be");
+    default:
+      return failure(Outcome::ConnectionLost, "the connection has ended");
+  }
+}
+
+}  // namespace
+
+TarnReportingClient::Connected TarnReportingClient::connect(const std::string& path, const Options& options) {
+  Connected connected;
+  Socket socket = Socket::connect(path, connected.errorNumber, connected.error);
+  if (socket.open()) {
+    connected.client = std::make_unique<TarnReportingClient>(std::move(socket), options);
+  }
+  return connected;
+}
+
+TarnReportingClient::TarnReportingClient(Socket socket, const Options& options)
+    : options_(options), socket_(std::move(socket)), frames_(options.maxReplyBytes) {}
+
+TarnReportingClient::~TarnReportingClient() {
+  mustBeOutsideHandlers("destroying the client");
+  close();
+}
+
+void TarnReportingClient::setLostHandler(LostHandler handler) {
+  const OwnerCheck::Use use(owner_);
+  lostHandler_ = std::move(handler);
+}
+
+Reply TarnReportingClient::call(const Request& request, std::optional<Milliseconds> timeout) {
+  const OwnerCheck::Use use(owner_);
+  mustBeOutsideHandlers("call");
+  const Deadline deadline = timeout ? Deadline(Clock::now() + *timeout) : std::nullopt;
+  std::optional<Reply> answer;
+  ReplyHandler handler = [&answer](Reply&& reply) { answer = std::move(reply); };
+  const SendStatus status = sendWithRoom(request, handler);
+  if (status != SendStatus::Sent) {
+    return notSent(status);
+  }
+  const std::uint64_t id = nextID_ - 1;
+  deliverLeftOvers();
+  while (!answer) {
+    if (deadline && Clock::now() >= *deadline) {
+      pending_.forget(id);
+      return failure(Outcome::TimedOut, "no reply in time");
+    }
+    exchange(deadline);
+  }
+  return std::move(*answer);
+}
+
+SendStatus TarnReportingClient::send(const Request& request, ReplyHandler handler) {
+  const OwnerCheck::Use use(owner_);
+  const SendStatus status = sendWithRoom(request, handler);
+  if (status == SendStatus::Sent && outgoing_.size() - written_ >= options_.autoFlushBytes) {
+    writeSome();
+  }
+  return status;
+}
+
+SendStatus TarnReportingClient::trySend(const Request& request, ReplyHandler handler) {
+  const OwnerCheck::Use use(owner_);
+  SendStatus status = append(request, handler);
+  if (status == SendStatus::Full && wantsToWrite()) {
+    writeSome();
+    status = append(request, handler);
+  }
+  if (status == SendStatus::Sent && outgoing_.size() - written_ >= options_.autoFlushBytes) {
+    writeSome();
+  }
+  return status;
+}
+
+std::future<Reply> TarnReportingClient::sendForFuture(const Request& request) {
+  auto promise = std::make_shared<std::promise<Reply>>();
+  std::future<Reply> future = promise->get_future();
+  const SendStatus status = send(request, [promise](Reply&& reply) { promise->set_value(std::move(reply)); });
+  if (status != SendStatus::Sent) {
+    promise->set_value(notSent(status));
+  }
+  return future;
+}
+
+bool TarnReportingClient::flush() {
+  const OwnerCheck::Use use(owner_);
+  mustBeOutsideHandlers("flush");
+  writeSome();
+  while (wantsToWrite()) {
+    exchange(std::nullopt);
+  }
+  return connected() && !writeBroken_;
+}
+
+std::size_t TarnReportingClient::dispatch() {
+  return wait(Milliseconds(0));
+}
+
+std::size_t TarnReportingClient::wait(Milliseconds timeout) {
+  const OwnerCheck::Use use(owner_);
+  mustBeOutsideHandlers("dispatch or wait");
+  const std::size_t before = delivered_;
+  deliverLeftOvers();
+  if (delivered_ == before) {
+    exchange(Clock::now() + timeout);
+  }
+  return delivered_ - before;
+}
+
+void TarnReportingClient::close() {
+  const OwnerCheck::Use use(owner_);
+  socket_.close();
+  outgoing_.clear();
+  written_ = 0;
+  ending_ = Ending::Closed;
+  if (!delivering_) {
+    deliverLeftOvers();
+  }
+}
+
+// Sends, waiting for room where that is allowed and can come.
+SendStatus TarnReportingClient::sendWithRoom(const Request& request, ReplyHandler& handler) {
+  SendStatus status = append(request, handler);
+  const bool isStart = request.operation == wire::Operation::StartReportingSessionForID;
+  while (status == SendStatus::Full && !delivering_ && !(isStart && countsAreFull(request))) {
+    exchange(std::nullopt);
+    status = append(request, handler);
+  }
+  return status;
+}
+
+bool TarnReportingClient::countsAreFull(const Request& request) const noexcept {
+  return request.operation == wire::Operation::StartReportingSessionForID
+             ? pending_.heldCount() >= options_.maxOutstanding
+             : pending_.waitingCount() >= options_.maxOutstanding;
+}
+
+// Puts the request in line or leaves everything, the handler too, as it was.
+SendStatus TarnReportingClient::append(const Request& request, ReplyHandler& handler) {
+  if (!connected() || writeBroken_) {
+    return SendStatus::NotConnected;
+  }
+  if (countsAreFull(request)) {
+    return SendStatus::Full;
+  }
+  const std::size_t before = outgoing_.size();
+  wire::Encoder(outgoing_).request(nextID_, request);
+  const bool tooLarge = outgoing_.size() - before - wire::kFrameHeaderBytes > options_.maxFrameBytes;
+  if (tooLarge || (wantsToWrite() && before > written_ && outgoing_.size() - written_ > options_.maxOutgoingBytes)) {
+    outgoing_.resize(before);
+    return tooLarge ? SendStatus::TooLarge : SendStatus::Full;
+  }
+  pending_.add(nextID_++, request, std::move(handler));
+  return SendStatus::Sent;
+}
+
+void TarnReportingClient::writeSome() {
+  while (wantsToWrite() && connected()) {
+    const std::ptrdiff_t sent = socket_.sendSome(std::string_view(outgoing_).substr(written_));
+    if (sent < 0) {
+      writeBroken_ = true;
+      written_ = outgoing_.size();
+    } else if (sent == 0) {
+      break;
+    } else {
+      written_ += static_cast<std::size_t>(sent);
+    }
+  }
+  if (written_ * 2 >= outgoing_.size()) {
+    outgoing_.erase(0, written_);
+    written_ = 0;
+  }
+}
+
+void TarnReportingClient::readSome(bool mayWait) {
+  while (connected()) {
+    const std::span<std::byte> space = frames_.space();
+    const std::ptrdiff_t received = socket_.receiveSome(space, mayWait);
+    if (received < 0) {
+      lose("the service ended the connection");
+      return;
+    }
+    frames_.received(static_cast<std::size_t>(received));
+    takeFrames();
+    if (static_cast<std::size_t>(received) < space.size()) {
+      return;
+    }
+    mayWait = false;
+  }
+}
+
+void TarnReportingClient::takeFrames() {
+  std::span<const std::byte> frame;
+  wire::DecodedReply decoded;
+  std::string reason;
+  while (connected()) {
+    switch (frames_.next(frame)) {
+      case wire::FrameBuffer::Next::Incomplete:
+        return;
+      case wire::FrameBuffer::Next::Oversize:
+        lose("a reply of " + std::to_string(frames_.announcedBytes()) + " bytes is too long");
+        return;
+      case wire::FrameBuffer::Next::Frame:
+        break;
+    }
+    if (!decoder_.decode(frame, decoded, reason)) {
+      lose("an unreadable reply: " + reason);
+      return;
+    }
+    takeReply(decoded);
+  }
+}
+
+void TarnReportingClient::takeReply(wire::DecodedReply& decoded) {
+  ReplyHandler handler;
+  if (!pending_.take(decoded.id, decoded.error.has_value(), handler)) {
+    ++unmatchedReplies_;
+    return;
+  }
+  Reply reply;
+  if (decoded.error) {
+    reply.outcome = Outcome::Error;
+    reply.error = std::move(*decoded.error);
+  }
+  reply.results = std::move(decoded.results);
+  deliver(handler, std::move(reply));
+  deliverCancelled();
+}
+
+// One round: write what can be, wait, read what is there, deliver.
+void TarnReportingClient::exchange(const Deadline& deadline) {
+  writeSome();
+  const bool writing = wantsToWrite();
+  if (connected() && !writing && !deadline) {
+    readSome(true);
+  } else if (connected()) {
+    std::optional<Milliseconds> left;
+    if (deadline) {
+      left = std::max(Milliseconds(0), std::chrono::ceil<Milliseconds>(*deadline - Clock::now()));
+    }
+    if (left == Milliseconds(0) || socket_.waitUntilReady(writing, left)) {
+      writeSome();
+      readSome(false);
+    }
+  }
+  deliverLeftOvers();
+}
+
+void TarnReportingClient::deliver(const ReplyHandler& handler, Reply&& reply) {
+  if (!handler) {
+    return;
+  }
+  delivering_ = true;
+  handler(std::move(reply));
+  delivering_ = false;
+  ++delivered_;
+}
+
+void TarnReportingClient::deliverCancelled() {
+  ReplyHandler handler;
+  while (pending_.takeCancelled(handler)) {
+    deliver(handler, failure(Outcome::Cancelled, "the reply can never come"));
+  }
+}
+
+// What became certain without a reply: starts that are never answered, and the end of the connection.
+void TarnReportingClient::deliverLeftOvers() {
+  deliverCancelled();
+  if (ending_ == Ending::None) {
+    return;
+  }
+  const bool lost = std::exchange(ending_, Ending::None) == Ending::Lost;
+  for (PendingReplies::Rest& rest : pending_.takeAll()) {
+    if (rest.killedService && lost) {
+      deliver(rest.handler, Reply());
+    } else {
+      deliver(rest.handler, lost ? failure(Outcome::ConnectionLost, lostWhy_)
+                                 : failure(Outcome::Cancelled, "the client closed the connection"));
+    }
+  }
+  if (lost && lostHandler_) {
+    delivering_ = true;
+    lostHandler_(lostWhy_);
+    delivering_ = false;
+  }
+}
+
+// The handlers hear of it in deliverLeftOvers, when no other handler is running.
+void TarnReportingClient::lose(std::string why) {
+  socket_.close();
+  outgoing_.clear();
+  written_ = 0;
+  ending_ = Ending::Lost;
+  lostWhy_ = std::move(why);
+}
+
+void TarnReportingClient::mustBeOutsideHandlers(const char* operation) const noexcept {
+  if (delivering_) {
+    OwnerCheck::failInsideHandler(operation);
+  }
+}
+
+}  // namespace tarn::client

@@ -1,0 +1,238 @@
+// PropertyListReader: reads checked property-list values out of a frame and hands them to a sink, in one pass. Internal
+// to wire/.
+//
+// The sink is a type parameter so that one reader serves whoever makes dictionaries and whoever only looks. It has
+//   void begin();                                        a container opens
+//   void add(std::string_view key, const ValueView&);    an entry of the open dictionary
+//   void add(const ValueView&);                          an item of the open array
+//   bool endDictionary(const std::string_view* key);     the open one ends and joins the one around it, under the key
+//   bool endArray(const std::string_view* key);          or, when that is null, as an item; false: a key stands twice
+// The outermost container is opened and ended by the caller. Recursion is no deeper than kMaxNesting.
+#pragma once
+
+#include <bit>
+#include <cstdint>
+#include <limits>
+#include <string_view>
+
+#include "plist/ValueView.h"
+#include "wire/CborReader.h"
+#include "wire/Operation.h"
+#include "wire/Utf8.h"
+
+namespace tarn::wire {
+
+// The value of a 16-bit float.
+float floatFromHalf(std::uint16_t half) noexcept;
+
+template <class Sink>
+class PropertyListReader {
+ public:
+  PropertyListReader(CborReader& in, Sink& sink) noexcept : in_(in), sink_(sink) {}
+
+  // What was wrong when a read returned false; a text that lives for ever.
+  const char* trouble() const noexcept { return trouble_; }
+
+  // The entries or items of a container whose head was read. `depth` is its level, 1 for an outermost one.
+  bool readEntries(const CborHead& head, std::size_t depth);
+  bool readItems(const CborHead& head, std::size_t depth);
+  // The value whose head was read; not for containers.
+  bool readScalar(const CborHead& head, plist::ValueView& value);
+
+ private:
+  bool readKey(std::string_view& key);
+  bool readContainer(const CborHead& head, const std::string_view* key, std::size_t depth);
+  bool readNegative(const CborHead& head, plist::ValueView& value);
+  bool readString(const CborHead& head, plist::ValueView& value);
+  bool readSimple(const CborHead& head, plist::ValueView& value);
+  bool readDate(const CborHead& head, plist::ValueView& value);
+  bool mayHold(const CborHead& head, std::size_t depth);
+  bool fail(const char* trouble) noexcept {
+    trouble_ = trouble;
+    return false;
+  }
+  static bool isContainer(const CborHead& head) noexcept {
+    return head.major == Major::Array || head.major == Major::Map;
+  }
+
+  CborReader& in_;
+  Sink& sink_;
+  const char* trouble_ = nullptr;
+};
+
+template <class Sink>
+bool PropertyListReader<Sink>::mayHold(const CborHead& head, std::size_t depth) {
+  if (head.open()) {
+    return fail("a container of indefinite length");
+  }
+  return depth <= kMaxNesting || fail("nested too deep");
+}
+
+template <class Sink>
+bool PropertyListReader<Sink>::readEntries(const CborHead& head, std::size_t depth) {
+  if (!mayHold(head, depth)) {
+    return false;
+  }
+  for (std::uint64_t i = 0; i < head.argument; ++i) {
+    std::string_view key;
+    CborHead valueHead;
+    if (!readKey(key) || !in_.readHead(valueHead)) {
+      return false;
+    }
+    if (isContainer(valueHead)) [[unlikely]] {
+      if (!readContainer(valueHead, &key, depth + 1)) return false;
+      continue;
+    }
+    plist::ValueView value;
+    if (!readScalar(valueHead, value)) {
+      return false;
+    }
+    sink_.add(key, value);
+  }
+  return true;
+}
+
+template <class Sink>
+bool PropertyListReader<Sink>::readItems(const CborHead& head, std::size_t depth) {
+  if (!mayHold(head, depth)) {
+    return false;
+  }
+  for (std::uint64_t i = 0; i < head.argument; ++i) {
+    CborHead itemHead;
+    if (!in_.readHead(itemHead)) {
+      return false;
+    }
+    if (isContainer(itemHead)) {
+      if (!readContainer(itemHead, nullptr, depth + 1)) return false;
+      continue;
+    }
+    plist::ValueView value;
+    if (!readScalar(itemHead, value)) {
+      return false;
+    }
+    sink_.add(value);
+  }
+  return true;
+}
+
+template <class Sink>
+bool PropertyListReader<Sink>::readContainer(const CborHead& head, const std::string_view* key, std::size_t depth) {
+  sink_.begin();
+  if (head.major == Major::Array) {
+    return readItems(head, depth) && sink_.endArray(key);
+  }
+  return readEntries(head, depth) && (sink_.endDictionary(key) || fail("a key given twice"));
+}
+
+template <class Sink>
+bool PropertyListReader<Sink>::readKey(std::string_view& key) {
+  CborHead head;
+  if (!in_.readHead(head)) {
+    return false;
+  }
+  if (head.major != Major::Text) [[unlikely]] {
+    return fail("a key that is no text");
+  }
+  if (head.open()) [[unlikely]] {
+    return fail("a text of indefinite length");
+  }
+  return in_.readBytes(head.argument, key) && (isUtf8(key) || fail("a key that is not UTF-8"));
+}
+
+template <class Sink>
+bool PropertyListReader<Sink>::readScalar(const CborHead& head, plist::ValueView& value) {
+  switch (head.major) {
+    case Major::Unsigned:
+      // One integer has one kind, whoever sent it: unsigned only where signed can't hold it.
+      value = head.argument <= static_cast<std::uint64_t>(std::numeric_limits<std::int64_t>::max())
+                  ? plist::ValueView(static_cast<std::int64_t>(head.argument))
+                  : plist::ValueView(head.argument);
+      return true;
+    case Major::Negative:
+      return readNegative(head, value);
+    case Major::Bytes:
+    case Major::Text:
+      return readString(head, value);
+    case Major::Tag:
+      return readDate(head, value);
+    case Major::Simple:
+      return readSimple(head, value);
+    default:
+      return fail("a container where none can be");
+  }
+}
+
+template <class Sink>
+bool PropertyListReader<Sink>::readNegative(const CborHead& head, plist::ValueView& value) {
+  if (head.argument > static_cast<std::uint64_t>(std::numeric_limits<std::int64_t>::max())) {
+    return fail("an integer below -2^63");
+  }
+  value = plist::ValueView(-1 - static_cast<std::int64_t>(head.argument));
+  return true;
+}
+
+template <class Sink>
+bool PropertyListReader<Sink>::readString(const CborHead& head, plist::ValueView& value) {
+  if (head.open()) [[unlikely]] {
+    return fail(head.major == Major::Text ? "a text of indefinite length" : "data of indefinite length");
+  }
+  std::string_view bytes;
+  if (!in_.readBytes(head.argument, bytes)) {
+    return false;
+  }
+  if (head.major == Major::Bytes) {
+    value = plist::ValueView(plist::DataView{bytes});
+    return true;
+  }
+  value = plist::ValueView(bytes);
+  return isUtf8(bytes) || fail("a text that is not UTF-8");
+}
+
+template <class Sink>
+bool PropertyListReader<Sink>::readSimple(const CborHead& head, plist::ValueView& value) {
+  switch (head.info) {
+    case 20:
+    case 21:
+      value = plist::ValueView(head.info == 21);
+      return true;
+    case 22:
+      return fail("a null");
+    case 23:
+      return fail("an undefined value");
+    case 25:
+      value = plist::ValueView(floatFromHalf(static_cast<std::uint16_t>(head.argument)));
+      return true;
+    case 26:
+      value = plist::ValueView(std::bit_cast<float>(static_cast<std::uint32_t>(head.argument)));
+      return true;
+    case 27:
+      value = plist::ValueView(std::bit_cast<double>(head.argument));
+      return true;
+    default:
+      return fail("a simple value other than true and false");
+  }
+}
+
+template <class Sink>
+bool PropertyListReader<Sink>::readDate(const CborHead& head, plist::ValueView& value) {
+  if (head.argument != 1 || head.open()) {
+    return fail("a tag other than that of a date");
+  }
+  CborHead number;
+  if (!in_.readHead(number)) {
+    return false;
+  }
+  const bool integer = number.major == Major::Unsigned || number.major == Major::Negative;
+  const bool floating = number.major == Major::Simple && number.info >= 25 && number.info <= kInfoEightBytes;
+  if (!integer && !floating) {
+    return fail("a date that is no number");
+  }
+  plist::ValueView seconds;
+  if (!readScalar(number, seconds)) {
+    return false;
+  }
+  value = plist::ValueView(plist::Date{seconds.asDouble()});
+  return true;
+}
+
+}  // namespace tarn::wire

@@ -1,0 +1,251 @@
+#include "wire/RequestDecoder.h"
+
+#include <limits>
+#include <utility>
+
+#include "wire/BuilderSink.h"
+#include "wire/PropertyListReader.h"
+#include "wire/WellFormed.h"
+
+namespace tarn::wire {
+
+namespace {
+
+// One pass over a frame. It stops at the first trouble and keeps what it was; whether the frame can be answered at all
+// is found out afterwards.
+class RequestPass {
+ public:
+  RequestPass(std::span<const std::byte> frame, DecodedRequest& request, plist::PackedBuilder& builder,
+              plist::KeyListCache& keyLists) noexcept
+      : in_(frame), request_(request), builder_(builder), keyLists_(keyLists) {}
+
+  bool run();
+  bool hasID() const noexcept { return hasID_; }
+  const char* trouble() const noexcept { return trouble_; }
+  ErrorCode code() const noexcept { return code_; }
+  std::string describe() const;
+
+ private:
+  bool readFrameHead();
+  bool readID();
+  bool readOperation();
+  bool readArguments();
+  bool readEnd();
+  bool readReporterID();
+  bool readDictionary();
+  bool readReporterIDs();
+  template <class Number>
+  bool readNumber(Number& number, const char* trouble);
+  bool readSigned(std::int64_t& number, const char* trouble);
+  bool countOpenItems();
+
+  bool fail(ErrorCode code, const char* trouble) noexcept {
+    code_ = code;
+    trouble_ = trouble;
+    return false;
+  }
+  bool badArgument(const char* trouble) noexcept { return fail(ErrorCode::BadArguments, trouble); }
+
+  CborReader in_;
+  DecodedRequest& request_;
+  plist::PackedBuilder& builder_;
+  plist::KeyListCache& keyLists_;
+  std::uint64_t items_ = 0;  // of the frame's array
+  bool openEnded_ = false;
+  bool hasID_ = false;
+  bool hasOperation_ = false;
+  ErrorCode code_ = ErrorCode::BadArguments;
+  const char* trouble_ = "not a CBOR array";
+};
+
+bool RequestPass::run() {
+  return readFrameHead() && readID() && readOperation() && readArguments() && readEnd();
+}
+
+bool RequestPass::readFrameHead() {
+  CborHead head;
+  if (!in_.readHead(head) || head.major != Major::Array) {
+    return false;
+  }
+  items_ = head.argument;
+  openEnded_ = head.open();
+  return !openEnded_ || countOpenItems();
+}
+
+// An open-ended array tells its length only at its break: a walk of its own counts, before the arguments are looked at.
+// It ends early where there are more than any operation takes.
+bool RequestPass::countOpenItems() {
+  constexpr std::uint64_t kTooMany = 8;
+  CborReader ahead = in_;
+  while (!ahead.atBreak() && items_ < kTooMany) {
+    if (ahead.atEnd() || skipItem(ahead) != nullptr) return false;
+    ++items_;
+  }
+  return true;
+}
+
+bool RequestPass::readID() {
+  trouble_ = "no readable id";
+  CborHead head;
+  if (items_ < 1 || !in_.readHead(head) || head.major != Major::Unsigned || head.open()) {
+    return false;
+  }
+  request_.id = head.argument;
+  hasID_ = true;
+  return true;
+}
+
+bool RequestPass::readOperation() {
+  if (items_ < 2) {
+    return badArgument("an operation is missing");
+  }
+  CborHead head;
+  if (!in_.readHead(head)) {
+    return false;
+  }
+  const std::optional<Operation> operation =
+      head.major == Major::Unsigned ? operationFromNumber(head.argument) : std::nullopt;
+  if (!operation) {
+    return fail(ErrorCode::UnknownOperation, "unknown operation");
+  }
+  request_.operation = *operation;
+  hasOperation_ = true;
+  return items_ - 2 == argumentCount(*operation) || badArgument("wrong number of arguments");
+}
+
+bool RequestPass::readArguments() {
+  switch (request_.operation) {
+    case Operation::SetServiceType:
+      return readNumber(request_.serviceType, "type: 0 to 65535 expected") && readReporterID();
+    case Operation::SetConfiguration:
+      return readDictionary() && readReporterID();
+    case Operation::SendMessage:
+      return readDictionary() && readNumber(request_.category, "category: 0 to 4294967295 expected") &&
+             readNumber(request_.type, "type: 0 to 65535 expected") && readReporterIDs();
+    case Operation::GetAllReporters:
+    case Operation::KillService:
+    case Operation::Status:
+      return true;
+    default:
+      return readReporterID();
+  }
+}
+
+bool RequestPass::readEnd() {
+  if (openEnded_) {
+    in_.skip(1);  // the break, which the count has seen
+  }
+  trouble_ = "bytes behind the array";
+  return in_.atEnd();
+}
+
+bool RequestPass::readSigned(std::int64_t& number, const char* trouble) {
+  CborHead head;
+  if (!in_.readHead(head)) {
+    return false;
+  }
+  const bool integer = head.major == Major::Unsigned || head.major == Major::Negative;
+  if (!integer || head.argument > static_cast<std::uint64_t>(std::numeric_limits<std::int64_t>::max())) {
+    return badArgument(trouble);
+  }
+  const auto magnitude = static_cast<std::int64_t>(head.argument);
+  number = head.major == Major::Unsigned ? magnitude : -1 - magnitude;
+  return true;
+}
+
+template <class Number>
+bool RequestPass::readNumber(Number& number, const char* trouble) {
+  CborHead head;
+  if (!in_.readHead(head)) {
+    return false;
+  }
+  if (head.major != Major::Unsigned || head.argument > std::numeric_limits<Number>::max()) {
+    return badArgument(trouble);
+  }
+  number = static_cast<Number>(head.argument);
+  return true;
+}
+
+bool RequestPass::readReporterID() {
+  return readSigned(request_.reporterID, "reporter ID: a signed 64-bit integer expected");
+}
+
+bool RequestPass::readDictionary() {
+  CborHead head;
+  if (!in_.readHead(head)) {
+    return false;
+  }
+  if (head.major != Major::Map) {
+    return badArgument("a dictionary expected");
+  }
+  BuilderSink sink(builder_, keyLists_);
+  PropertyListReader<BuilderSink> reader(in_, sink);
+  builder_.begin();
+  if (!reader.readEntries(head, 1)) {
+    builder_.reset();
+    return fail(ErrorCode::NotPropertyList, reader.trouble());
+  }
+  std::optional<plist::Dictionary> dictionary = builder_.finishDictionary(keyLists_);
+  if (!dictionary) {
+    builder_.reset();
+    return fail(ErrorCode::NotPropertyList, "a key given twice");
+  }
+  request_.dictionary = std::move(*dictionary);
+  return true;
+}
+
+bool RequestPass::readReporterIDs() {
+  constexpr const char* kTrouble = "reporter IDs: an array of signed 64-bit integers or null expected";
+  CborHead head;
+  if (!in_.readHead(head)) {
+    return false;
+  }
+  if (head.major == Major::Simple && head.info == 22) {
+    return true;
+  }
+  if (head.major != Major::Array || (!head.open() && head.argument > in_.left())) {
+    return badArgument(kTrouble);
+  }
+  std::vector<std::int64_t>& ids = request_.reporterIDs.emplace();
+  ids.reserve(static_cast<std::size_t>(head.argument));
+  while (head.open() ? !in_.atBreak() : ids.size() < head.argument) {
+    std::int64_t id = 0;
+    if (!readSigned(id, kTrouble)) return false;
+    ids.push_back(id);
+  }
+  in_.skip(head.open() ? 1 : 0);
+  return true;
+}
+
+std::string RequestPass::describe() const {
+  const char* trouble = trouble_ != nullptr ? trouble_ : "not well-formed";
+  if (!hasOperation_) {
+    return trouble;
+  }
+  std::string text(operationName(request_.operation));
+  text += code_ == ErrorCode::NotPropertyList ? ": not a property list: " : ": ";
+  return text += trouble;
+}
+
+}  // namespace
+
+DecodeOutcome RequestDecoder::decode(std::span<const std::byte> frame, DecodedRequest& request, Refusal& refusal) {
+  request = DecodedRequest{};
+  RequestPass pass(frame, request, builder_, keyLists_);
+  if (pass.run()) [[likely]] {
+    return DecodeOutcome::Ok;
+  }
+  if (const char* why = checkOneItem(frame)) {
+    refusal.text = why;
+    return DecodeOutcome::Unreadable;
+  }
+  if (!pass.hasID()) {
+    refusal.text = pass.trouble();
+    return DecodeOutcome::Unreadable;
+  }
+  refusal.code = pass.code();
+  refusal.text = pass.describe();
+  return DecodeOutcome::Refused;
+}
+
+}  // namespace tarn::wire

@@ -1,0 +1,21 @@
+// Whether bytes are well-formed CBOR, whatever they mean. Asked only about frames that were found wanting, to tell
+// whether they can be answered. Internal to wire/.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <span>
+
+#include "wire/CborReader.h"
+
+namespace tarn::wire {
+
+// Moves over one whole item, nested ones included. Null when it is well-formed, else the reason (a text that lives for
+// ever). Takes no stack; four bytes of memory for each container that is open with more to come, of which there can't
+// be more than half as many as there are bytes.
+const char* skipItem(CborReader& in);
+
+// Null when the bytes are exactly one well-formed item, else the reason.
+const char* checkOneItem(std::span<const std::byte> bytes);
+
+}  // namespace tarn::wire
