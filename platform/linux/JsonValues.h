@@ -1,0 +1,55 @@
+// JsonValues: property-list values as JSON text that people write by hand: defaults files, device properties, scripts.
+//
+// JSON integers are integers, other numbers doubles. Two forms hold what JSON has no word for: {"$date": seconds} is a
+// date, {"$data": "base64"} is data; an object is such a form when that is its one member. There is no null. What is
+// written here reads back equal.
+//
+// Reading builds the values while it goes, never recurses, and stops at the first fault with its line and column.
+// Nesting is bounded. Threads: any; everything is stateless. Nothing is thrown.
+#pragma once
+
+#include <cstddef>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "plist/Value.h"
+
+namespace tarn::linux_host {
+
+// As deep as a dictionary may be on the wire; the outermost container is level 1.
+constexpr std::size_t kMaximumJsonNesting = 64;
+
+// What is wrong with a JSON text, and where: both counted from 1, the column in bytes, at the end of what was read.
+struct JsonFault {
+  std::size_t line = 1;
+  std::size_t column = 1;
+  std::string text;
+
+  // "3:14: null is not allowed here"
+  std::string description() const;
+};
+
+struct JsonReading {
+  plist::Value value;  // absent when there is a fault
+  std::optional<JsonFault> fault;
+  std::vector<std::size_t> memberLines;  // where each member of the outermost object begins, in its order
+};
+
+// Reads a whole text as one value. An object's member given twice is a fault.
+JsonReading readJson(std::string_view text, std::size_t maximumNesting = kMaximumJsonNesting);
+
+enum class JsonLayout {
+  OneLine,   // without a line end
+  Indented,  // a member or item a line, two blanks a level, a line end at the end
+};
+
+// The value as JSON text; nothing for what would not read back equal: an absent value, a number that is not finite,
+// text that is not UTF-8, a dictionary that would read as one of the $ forms, nesting beyond the limit.
+std::optional<std::string> jsonText(const plist::ValueView& value, JsonLayout layout = JsonLayout::OneLine);
+
+// The bytes of a base64 text (RFC 4648, padded, no line breaks); nothing when it isn't one.
+std::optional<std::string> decodeBase64(std::string_view text);
+
+}  // namespace tarn::linux_host
