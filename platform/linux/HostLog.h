@@ -1,0 +1,23 @@
+// hostLog: the log lines of the host's own parts (loop, listener, connections), in the form of all others: the prefix
+// "%25s:%-5d " (module, line), then the text. Threads: any.
+#pragma once
+
+#include <string>
+#include <string_view>
+
+#include "platform/Log.h"
+
+namespace tarn::linux_host {
+
+// What happens on a client's connection.
+inline constexpr platform::LogCategory kConnectionCategory{"sys.oxbow.tarnkit", "tarnrc"};
+// Everything else of the host: listener, loop, signals, watchdog.
+inline constexpr platform::LogCategory kHostCategory{"sys.oxbow.tarnkit", "tarnrs"};
+
+void hostLog(platform::Log& log, const platform::LogCategory& category, platform::LogLevel level,
+             std::string_view module, std::string_view text, int line = __builtin_LINE());
+
+// ": " and the text of an errno value, for the end of a line.
+std::string errorSuffix(int error);
+
+}  // namespace tarn::linux_host

@@ -1,0 +1,88 @@
+// JsonDefaultsStore: the defaults store as one JSON file a suite or application domain, defaults/SUITE.json.
+//
+//   - A read sees what any process has written: the file is looked at each time and read anew when it has changed.
+//   - A write replaces the file whole, on disk before it returns, and reads it first under a lock that all writers
+//   take,
+//     so that writers of different keys lose nothing. A writer waits at most 5 seconds for the lock.
+//   - A file that can't be read or is no JSON object reads as empty and is logged with its line and column, once for
+//   each
+//     state of the file. It is never replaced: a write to it fails until somebody mends or removes it, because it may
+//     hold more than the one key that is written.
+//   - A suite's name is a plain file name. One of any other form holds nothing and takes nothing.
+//
+// Bounds: a file is at most 1 MiB; the content of at most 64 suites is kept in memory.
+// Threads: any. A write waits for the disk.
+#pragma once
+
+#include <sys/stat.h>
+
+#include <cstddef>
+#include <cstdint>
+#include <map>
+#include <mutex>
+#include <string>
+
+#include "platform/DefaultsStore.h"
+#include "platform/Log.h"
+#include "plist/Dictionary.h"
+
+namespace tarn::linux_host {
+
+class JsonDefaultsStore final : public platform::DefaultsStore {
+ public:
+  static constexpr std::size_t kMaximumFileBytes = std::size_t{1} << 20U;
+
+  // `folder` holds the suites' files; it is made with the first write. The log must outlive the store.
+  JsonDefaultsStore(std::string folder, platform::Log& log);
+  JsonDefaultsStore(const JsonDefaultsStore&) = delete;
+  JsonDefaultsStore& operator=(const JsonDefaultsStore&) = delete;
+
+  plist::Value value(std::string_view suite, std::string_view key) const override;
+  // The preferences of the user "mobile" are the suite of the application domain's name. No other user has any.
+  plist::Value preference(std::string_view key, std::string_view applicationDomain,
+                          std::string_view user) const override;
+  // A failure is logged.
+  [[nodiscard]] bool setValue(std::string_view suite, std::string_view key, const plist::ValueView& value) override;
+
+  // A whole suite.
+  struct Suite {
+    plist::Dictionary values;  // empty when there is none or it is broken
+    std::string fault;         // what is wrong with its file: "FILE:LINE:COLUMN: text" or "FILE: text"
+  };
+  Suite suite(std::string_view name) const;
+  // Stores a value, an absent one removes the key; empty when it is on disk, else what is wrong. Nothing is logged.
+  [[nodiscard]] std::string store(std::string_view suite, std::string_view key, const plist::ValueView& value);
+
+ private:
+  // Which state of the file was read: another file, size or time is another state.
+  struct Stamp {
+    bool exists = false;
+    int error = 0;
+    std::uint64_t device = 0;
+    std::uint64_t inode = 0;
+    std::int64_t size = 0;
+    std::int64_t modifiedNanoseconds = 0;
+    std::int64_t changedNanoseconds = 0;
+    friend bool operator==(const Stamp&, const Stamp&) = default;
+  };
+  struct Cached {
+    Stamp stamp;
+    bool settled = false;  // a later change is sure to bring another stamp
+    Suite suite;
+    Stamp loggedStamp;  // of the broken file that was logged last
+    std::string loggedFault;
+  };
+
+  std::string pathOf(std::string_view suite) const;
+  static Stamp stampOf(int result, const struct stat& facts);
+  static bool isSettled(const Stamp& stamp);
+  static Suite read(const std::string& path, Stamp& stamp);
+  void logFault(Cached& cached) const;
+
+  const std::string folder_;
+  platform::Log& log_;
+  mutable std::mutex mutex_;
+  mutable std::map<std::string, Cached, std::less<>> cache_;  // guarded by mutex_
+};
+
+}  // namespace tarn::linux_host

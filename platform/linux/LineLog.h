@@ -1,0 +1,57 @@
+// LineLog: a log sink that writes lines to a descriptor; what stderr and a log file have in common.
+//
+// Each entry is one write, so that entries of several threads, and of several processes that append to one file, stay
+// whole. A line that can't be written (a full disk, a closed pipe) is counted as lost; the first line that can be
+// written again is led by one that says how many were lost and why. A descriptor that blocks slows its writers down.
+// Threads: any.
+#pragma once
+
+#include <cstdint>
+#include <mutex>
+#include <string>
+#include <string_view>
+
+#include "platform/Clock.h"
+#include "platform/Log.h"
+
+namespace tarn::linux_host {
+
+class LineLog : public platform::Log {
+ public:
+  LineLog(const LineLog&) = delete;
+  LineLog& operator=(const LineLog&) = delete;
+
+  void write(const platform::LogEntry& entry) noexcept final;
+  // Lines lost and not yet told.
+  std::uint64_t lostLines() const;
+
+ protected:
+  LineLog(const platform::Clock& clock, platform::LogLevel threshold);
+
+  // Where the next line goes, or a negative errno value. Called with the sink locked.
+  virtual int descriptor() = 0;
+
+ private:
+  int writeWhole(std::string_view line);
+  int writeLost();
+
+  const platform::Clock& clock_;
+  mutable std::mutex mutex_;
+  std::uint64_t lost_ = 0;  // guarded by mutex_, as are all below
+  int lostError_ = 0;
+  bool torn_ = false;  // the last line was cut off in the middle
+};
+
+// The standard error stream, or another descriptor that is open already. It isn't closed.
+class StreamLog final : public LineLog {
+ public:
+  StreamLog(int descriptor, const platform::Clock& clock, platform::LogLevel threshold)
+      : LineLog(clock, threshold), descriptor_(descriptor) {}
+
+ private:
+  int descriptor() override { return descriptor_; }
+
+  const int descriptor_;
+};
+
+}  // namespace tarn::linux_host
