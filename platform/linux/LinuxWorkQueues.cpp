@@ -1,0 +1,43 @@
+#include "platform/linux/LinuxWorkQueues.h"
+
+#include "platform/linux/CurrentQueue.h"
+
+namespace tarn::linux_host {
+
+namespace {
+
+// What a holder of a queue holds: the way into the queue's line. The line itself lives on while it has work.
+class PooledQueue final : public platform::WorkQueue {
+ public:
+  explicit PooledQueue(std::shared_ptr<WorkerPool> pool) : pool_(std::move(pool)) {}
+  void async(platform::Work work) override { pool_->add(line_, std::move(work)); }
+  void asyncAfter(std::chrono::nanoseconds delay, platform::Work work) override {
+    pool_->addAfter(line_, delay, std::move(work));
+  }
+  bool isCurrent() const noexcept override { return CurrentQueue::is(line_.get()); }
+  std::size_t waiting() const noexcept override { return pool_->waiting(line_); }
+
+ private:
+  std::shared_ptr<WorkerPool> pool_;
+  std::shared_ptr<WorkerPool::Line> line_ = std::make_shared<WorkerPool::Line>();
+};
+
+}  // namespace
+
+LinuxWorkQueues::LinuxWorkQueues(const platform::Clock& clock, std::shared_ptr<platform::WorkQueue> serverQueue)
+    : serverQueue_(std::move(serverQueue)), pool_(std::make_shared<WorkerPool>(clock)) {}
+
+LinuxWorkQueues::~LinuxWorkQueues() {
+  pool_->stop();
+}
+
+std::shared_ptr<platform::WorkQueue> LinuxWorkQueues::makeSerialQueue(std::string_view,
+                                                                      platform::QualityOfService quality) {
+  if (quality == platform::QualityOfService::UserInteractive) {
+    return serverQueue_;
+  }
+  pool_->start(kThreads);
+  return std::make_shared<PooledQueue>(pool_);
+}
+
+}  // namespace tarn::linux_host

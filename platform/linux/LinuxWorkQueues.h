@@ -1,0 +1,35 @@
+// LinuxWorkQueues: makes the serial queues of the process. The user-interactive queue is the main loop's own; all
+// others share a small pool of threads.
+//
+// Owned by the entry point; the queues that it made may outlive it, but then run nothing more. Threads: any.
+#pragma once
+
+#include <memory>
+
+#include "platform/Clock.h"
+#include "platform/WorkQueue.h"
+#include "platform/linux/WorkerPool.h"
+
+namespace tarn::linux_host {
+
+class LinuxWorkQueues final : public platform::WorkQueues {
+ public:
+  // Enough for the few queues that block now and then (a back-end's, two tools at once) not to hold up the others.
+  static constexpr std::size_t kThreads = 4;
+
+  LinuxWorkQueues(const platform::Clock& clock, std::shared_ptr<platform::WorkQueue> serverQueue);
+  LinuxWorkQueues(const LinuxWorkQueues&) = delete;
+  LinuxWorkQueues& operator=(const LinuxWorkQueues&) = delete;
+  // Runs what is ready on the pool's queues, then ends the threads.
+  ~LinuxWorkQueues() override;
+
+  // The threads are started with the first queue that needs them.
+  std::shared_ptr<platform::WorkQueue> makeSerialQueue(std::string_view name,
+                                                       platform::QualityOfService quality) override;
+
+ private:
+  std::shared_ptr<platform::WorkQueue> serverQueue_;
+  std::shared_ptr<WorkerPool> pool_;
+};
+
+}  // namespace tarn::linux_host

@@ -1,0 +1,60 @@
+// ListenSocket: the socket on which clients reach the service: handed over by the service manager, or bound to a path.
+//
+// A path belongs to one service at a time. Who holds the lock on PATH.lock may replace a stale socket file and remove
+// its own at the end, so two services that start at once never take each other's file away. A socket that somebody
+// listens on is never replaced, nor is a file that is no socket.
+//
+// Owned by the listener. Threads: one at a time; bindTo() sets the process's file mode mask for a moment, so it is
+// called before other threads make files.
+#pragma once
+
+#include <sys/types.h>
+
+#include <optional>
+#include <string>
+
+#include "platform/linux/UniqueDescriptor.h"
+
+namespace tarn::linux_host {
+
+class ListenSocket {
+ public:
+  static constexpr mode_t kDefaultMode = 0660;
+
+  struct Result;
+
+  ListenSocket() = default;
+  ListenSocket(ListenSocket&& other) noexcept;
+  ListenSocket& operator=(ListenSocket&& other) noexcept;
+  ListenSocket(const ListenSocket&) = delete;
+  ListenSocket& operator=(const ListenSocket&) = delete;
+  // Closes it; a socket file that bindTo() made is removed when it is still the same one.
+  ~ListenSocket();
+
+  // The socket that the service manager handed over (LISTEN_FDS), taken out of the environment. Neither socket nor
+  // error when it handed over none; an error when it is more than one or not a listening Unix stream socket.
+  static Result takeHandedOver();
+  // A socket that listens at this path, with this file mode before anybody can connect.
+  static Result bindTo(const std::string& path, mode_t mode = kDefaultMode);
+
+  int descriptor() const noexcept { return socket_.get(); }
+  explicit operator bool() const noexcept { return static_cast<bool>(socket_); }
+  // "/run/x/socket", or "handed over".
+  const std::string& name() const noexcept { return name_; }
+
+ private:
+  void close() noexcept;
+
+  UniqueDescriptor socket_;
+  UniqueDescriptor lock_;  // held while the file is ours
+  std::string name_;
+  dev_t device_ = 0;  // with the inode: which file is ours
+  ino_t inode_ = 0;
+};
+
+struct ListenSocket::Result {
+  ListenSocket socket;
+  std::string error;  // one line that names the path; empty when nothing went wrong
+};
+
+}  // namespace tarn::linux_host
