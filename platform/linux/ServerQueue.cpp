@@ -87,7 +87,7 @@ bool ServerQueue::refill() {
   batch_.clear();
   next_ = 0;
   if (batch_.capacity() > kKeptPieces) {
-    batch_ = {};
+    batch_ = std::vector<platform::Work>();
   }
   const std::lock_guard lock(mutex_);
   if (!delayed_.empty()) {
