@@ -55,7 +55,7 @@ INSTANTIATE_TEST_SUITE_P(Table, WatchdogDecision,
                                            AliveCase{"WaitOfTheLongest", 7, 7, false, 180s, false},
                                            AliveCase{"WaitBeyondTheLongest", 7, 7, false, 180s + 1ns, false},
                                            AliveCase{"LongWaitButProgress", 7, 8, false, 200s, true}),
-                         [](const auto& info) { return std::string(info.param.name); });
+                         [](const auto& row) { return std::string(row.param.name); });
 
 class FakeManager final : public ServiceManager {
  public:
