@@ -1,13 +1,17 @@
 #include "platform/linux/LinuxCommandRunner.h"
 
+#include <fcntl.h>
 #include <gtest/gtest.h>
-#include <signal.h>
+#include <poll.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
-#include <cerrno>
 #include <chrono>
 #include <csignal>
+#include <cstdlib>
+#include <filesystem>
 #include <string>
+#include <system_error>
 #include <thread>
 #include <vector>
 
@@ -39,15 +43,33 @@ Result run(const std::string& command, std::chrono::nanoseconds timeLimit = 60s)
   return result;
 }
 
-// Whether the process ends within ten seconds.
-bool ends(pid_t process) {
-  const auto deadline = std::chrono::steady_clock::now() + 10s;
-  while (::kill(process, 0) == 0) {
-    if (std::chrono::steady_clock::now() > deadline) return false;
-    std::this_thread::sleep_for(2ms);
+// A named pipe that a tool holds open for as long as it lives.
+class LifeLine {
+ public:
+  LifeLine() {
+    std::string pattern = std::filesystem::temp_directory_path() / "tarn-command.XXXXXX";
+    if (const char* made = ::mkdtemp(pattern.data())) directory_ = made;
+    if (::mkfifo(path().c_str(), 0600) == 0) pipe_ = ::open(path().c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC);
   }
-  return errno == ESRCH;
-}
+  ~LifeLine() {
+    ::close(pipe_);
+    std::error_code ignored;
+    std::filesystem::remove_all(directory_, ignored);
+  }
+  LifeLine(const LifeLine&) = delete;
+  LifeLine& operator=(const LifeLine&) = delete;
+
+  std::string path() const { return directory_ + "/pipe"; }
+  // Whether everybody who held the pipe ends within this time.
+  bool endsWithin(std::chrono::milliseconds time) const {
+    pollfd wanted{pipe_, POLLIN, 0};
+    return ::poll(&wanted, 1, static_cast<int>(time.count())) == 1 && (wanted.revents & POLLHUP) != 0;
+  }
+
+ private:
+  std::string directory_;
+  int pipe_ = -1;
+};
 
 TEST(LinuxCommandRunner, GivesTheLinesWithTheirNewlines) {
   const auto result = run("printf 'one\\n\\ntwo\\n'");
@@ -118,23 +140,30 @@ TEST(LinuxCommandRunner, AToolThatClosesItsOutputAndHangsIsEndedToo) {
 }
 
 TEST(LinuxCommandRunner, WhatAHangingToolStartedEndsWithIt) {
-  const auto result = run("sleep 600 & echo $!; wait", 300ms);
+  const LifeLine life;
+  LinuxCommandRunner runner;
+  auto started = runner.start("(exec 3>" + life.path() + "; echo held; sleep 600) & wait", 500ms);
+  ASSERT_FALSE(started.failed());
+  ASSERT_EQ(started.value->readLine(kLineBytes), "held\n");
+  EXPECT_FALSE(life.endsWithin(0ms));
 
-  ASSERT_EQ(result.lines.size(), 1U);
-  EXPECT_EQ(result.end.kind, CommandEnd::Kind::TimedOut);
-  EXPECT_TRUE(ends(std::stoi(result.lines[0])));
+  EXPECT_EQ(started.value->readLine(kLineBytes), std::nullopt);
+  EXPECT_EQ(started.value->close().kind, CommandEnd::Kind::TimedOut);
+
+  EXPECT_TRUE(life.endsWithin(10s));
 }
 
 TEST(LinuxCommandRunner, DestroyingARunningCommandEndsIt) {
+  const LifeLine life;
   LinuxCommandRunner runner;
-  auto started = runner.start("echo $$; sleep 600", 60s);
+  auto started = runner.start("exec 3>" + life.path() + "; echo held; sleep 600", 60s);
   ASSERT_FALSE(started.failed());
-  const auto line = started.value->readLine(kLineBytes);
-  ASSERT_TRUE(line);
+  ASSERT_EQ(started.value->readLine(kLineBytes), "held\n");
+  EXPECT_FALSE(life.endsWithin(0ms));
 
   started.value.reset();
 
-  EXPECT_TRUE(ends(std::stoi(*line)));
+  EXPECT_TRUE(life.endsWithin(10s));
 }
 
 TEST(LinuxCommandRunner, AToolThatWritesBehindTheCloseIsNotWaitedForLong) {
