@@ -1,0 +1,260 @@
+// tarnreportingd: puts the parts together and serves. It owns no behaviour; what a part does is told where the part is.
+//
+// The process ends without tearing the parts down: what the back-ends hold is committed, then it exits at once.
+// Sessions are not stopped.
+#include <algorithm>
+#include <cstdlib>
+#include <iostream>
+#include <memory>
+#include <optional>
+#include <string>
+
+#include "derived/TarnReportingSystemMonitor.h"
+#include "platform/Facilities.h"
+#include "platform/ProcessControl.h"
+#include "platform/linux/ConnectionHost.h"
+#include "platform/linux/DescriptorLimit.h"
+#include "platform/linux/FileNotificationCenter.h"
+#include "platform/linux/HostConfiguration.h"
+#include "platform/linux/HostLog.h"
+#include "platform/linux/HostPaths.h"
+#include "platform/linux/JsonDefaultsStore.h"
+#include "platform/linux/JsonDeviceProperties.h"
+#include "platform/linux/LinuxClock.h"
+#include "platform/linux/LinuxCommandRunner.h"
+#include "platform/linux/LinuxConditions.h"
+#include "platform/linux/LinuxFileSystem.h"
+#include "platform/linux/LinuxLocalCalendar.h"
+#include "platform/linux/LinuxProcessEnvironment.h"
+#include "platform/linux/LinuxProcessFacts.h"
+#include "platform/linux/LinuxRandomSource.h"
+#include "platform/linux/LinuxTracePoints.h"
+#include "platform/linux/LinuxWorkQueues.h"
+#include "platform/linux/LogTarget.h"
+#include "platform/linux/MainLoop.h"
+#include "platform/linux/ServiceManager.h"
+#include "platform/linux/ServiceOptions.h"
+#include "platform/linux/SignalSource.h"
+#include "platform/linux/SocketListener.h"
+#include "platform/linux/StateFolder.h"
+#include "platform/linux/Watchdog.h"
+#include "platform/recorder/Recorder.h"
+#include "platform/recorder/RecorderTallyService.h"
+#include "service/TarnReportingPlatform.h"
+#include "service/TarnReportingService.h"
+#include "service/TarnReportingWorkerClasses.h"
+#include "session/TarnReportingSession.h"
+
+namespace tarn {
+namespace {
+
+using namespace linux_host;
+
+constexpr std::string_view kModule = "main";
+
+// What is read before anything runs.
+struct Setup {
+  ServiceOptions options;
+  HostConfiguration configuration;
+  JsonDeviceProperties deviceProperties;
+};
+
+// One line for whoever started the service.
+int refuse(const std::string& complaint, int status) {
+  std::cerr << "tarnreportingd: " << complaint << '\n';
+  return status;
+}
+
+HostLimits limitsOf(const HostConfiguration& configuration) {
+  HostLimits limits;
+  limits.maxFrameBytes = configuration.limits.maximumFrameBytes;
+  limits.maxConnections = std::min(limits.maxConnections, connectionsWithin(raiseDescriptorLimit()));
+  return limits;
+}
+
+recorder::RecorderOptions recorderOptionsOf(const Setup& setup) {
+  recorder::RecorderOptions options;
+  options.file = setup.options.stateDirectory + "/recorder.sqlite3";
+  options.maxMegabytes = static_cast<std::int64_t>(setup.configuration.recorder.maximumMegabytes);
+  options.maxAgeDays = static_cast<double>(setup.configuration.recorder.maximumAgeDays);
+  return options;
+}
+
+LinuxFileSystem::Directories directoriesOf(const Setup& setup) {
+  return {setup.configuration.paths.diagnosticLogs.value_or(setup.options.stateDirectory) + "/DiagnosticLogs", "/tmp"};
+}
+
+// The machine's facilities, the recorder in place of its back-ends, and the service on top.
+class Host final : public platform::ProcessControl {
+ public:
+  Host(const Setup& setup, LinuxClock& clock, platform::Log& log, const std::shared_ptr<SignalSource>& signals)
+      : log_(log),
+        signals_(signals),
+        loop_(clock),
+        connections_(loop_, log, limitsOf(setup.configuration)),
+        recorder_(recorderOptionsOf(setup), log, clock),
+        tally_(recorder_, clock, setup.configuration.tally.inUse),
+        workQueues_(clock, loop_.queue()),
+        conditions_(clock, loop_.queue(), loop_.progress()),
+        defaults_(setup.options.stateDirectory + "/defaults", log),
+        notifications_(setup.options.stateDirectory + "/notifications", log),
+        fileSystem_(directoriesOf(setup)),
+        deviceProperties_(setup.deviceProperties),
+        clock_(clock),
+        watchdog_(clock, loop_.progress(), serviceManager_) {}
+
+  // Serves until a signal; the exit status.
+  int serve(ListenSocket socket) {
+    if (!loop_.startError().empty()) {
+      return refuse(loop_.startError(), kExitFailure);
+    }
+    if (const std::string error = SignalSource::start(signals_, loop_, [this](int) { loop_.stop(); }); !error.empty()) {
+      return refuse(error, kExitFailure);
+    }
+    startRecorder();
+    TarnReportingInstallFacilities(&facilities_);
+    TarnReportingSession::setAllWorkerClasses(TarnReportingWorkerClasses());
+    service_ = TarnReportingService::create();
+    if (TarnReportingSystemMonitor::TarnReportingDefaults()["disable_reporting"].asBool()) {
+      hostLog(log_, kHostCategory, platform::LogLevel::Default, kModule,
+              "reporting is disabled by the service's defaults");
+      service_->setReportingEnabled(false);
+    }
+    connections_.setStatusSource([this] { return status(); });
+    listener_ = std::make_shared<SocketListener>(connections_, std::move(socket));
+    listener_->setDelegate(service_);
+    listener_->resume();
+    serviceManager_.notifyReady();
+    watchdog_.start();
+    loop_.run();
+    end();
+    return kExitSuccess;
+  }
+
+  void exitProcess(int status) override {
+    end();
+    std::_Exit(status);
+  }
+
+ private:
+  void startRecorder() {
+    recorder_.setRoomHandler([this] { connections_.resumeRequests(); });
+    connections_.gate.setPauseSource([this] { return recorder_.isFull(); });
+    recorder_.start();
+  }
+
+  plist::Dictionary status() {
+    const recorder::RecorderCounters counters = recorder_.counters();
+    return connections_.ledger.status(
+        service_->sessionCount(), loop_.queue()->waiting(),
+        {counters.handedOver, counters.committed, counters.waiting, counters.expired, counters.failed});
+  }
+
+  // Takes no more, and makes safe what was taken.
+  void end() {
+    serviceManager_.notifyStopping();
+    watchdog_.stop();
+    listener_->close();
+    recorder_.shutdown();
+  }
+
+  platform::Log& log_;
+  const std::shared_ptr<SignalSource> signals_;
+  MainLoop loop_;
+  ConnectionHost connections_;
+  recorder::Recorder recorder_;
+  recorder::RecorderTallyService tally_;
+  LinuxWorkQueues workQueues_;
+  LinuxConditions conditions_;
+  LinuxTracePoints tracePoints_;
+  JsonDefaultsStore defaults_;
+  FileNotificationCenter notifications_;
+  LinuxProcessFacts processFacts_;
+  LinuxFileSystem fileSystem_;
+  LinuxLocalCalendar localCalendar_;
+  LinuxRandomSource randomSource_;
+  LinuxProcessEnvironment processEnvironment_;
+  LinuxCommandRunner commandRunner_;
+  JsonDeviceProperties deviceProperties_;
+  LinuxClock& clock_;
+  ServiceManager serviceManager_;
+  Watchdog watchdog_;
+  std::shared_ptr<TarnReportingService> service_;
+  std::shared_ptr<SocketListener> listener_;
+  const platform::Facilities facilities_{.clock = clock_,
+                                         .workQueues = workQueues_,
+                                         .conditions = conditions_,
+                                         .log = log_,
+                                         .tracePoints = tracePoints_,
+                                         .deviceProperties = deviceProperties_,
+                                         .defaults = defaults_,
+                                         .notifications = notifications_,
+                                         .processFacts = processFacts_,
+                                         .processControl = *this,
+                                         .tally = tally_,
+                                         .fileSystem = fileSystem_,
+                                         .localCalendar = localCalendar_,
+                                         .randomSource = randomSource_,
+                                         .processEnvironment = processEnvironment_,
+                                         .commandRunner = commandRunner_};
+};
+
+// The listening socket: the one handed over, else the one named.
+ListenSocket::Result openSocket(const ServiceOptions& options) {
+  ListenSocket::Result handedOver = ListenSocket::takeHandedOver();
+  if (handedOver.socket || !handedOver.error.empty()) {
+    return handedOver;
+  }
+  if (!options.socketPath) {
+    handedOver.error = "no socket: none was handed over, and neither --socket nor XDG_RUNTIME_DIR names one";
+    return handedOver;
+  }
+  return ListenSocket::bindTo(*options.socketPath);
+}
+
+int serve(Setup& setup) {
+  if (setup.options.configurationFile) {
+    ReadConfiguration read = readConfiguration(*setup.options.configurationFile);
+    if (!read.configuration) {
+      return refuse(read.error, kExitConfiguration);
+    }
+    setup.configuration = std::move(*read.configuration);
+  }
+  if (setup.options.devicePropertiesFile) {
+    if (const std::string error = setup.deviceProperties.load(*setup.options.devicePropertiesFile); !error.empty()) {
+      return refuse(error, kExitConfiguration);
+    }
+  }
+  if (const std::string error = prepareStateDirectory(setup.options.stateDirectory); !error.empty()) {
+    return refuse(error, kExitFailure);
+  }
+  const auto signals = std::make_shared<SignalSource>();  // before any thread
+  ListenSocket::Result socket = openSocket(setup.options);
+  if (!socket.socket) {
+    return refuse(socket.error, kExitFailure);
+  }
+  LinuxClock clock;
+  OpenedLog log = openLog(setup.options.logTarget, setup.options.logLevel, clock);
+  if (!log.log) {
+    return refuse(log.error, kExitFailure);
+  }
+  Host host(setup, clock, *log.log, signals);
+  const int status = host.serve(std::move(socket.socket));
+  std::_Exit(status);  // other threads still use the host's parts
+}
+
+}  // namespace
+}  // namespace tarn
+
+int main(int argumentCount, char** arguments) {
+  using namespace tarn;
+  const linux_host::ServiceCommand command =
+      linux_host::parseServiceCommand(argumentCount, arguments, linux_host::HostEnvironment::current());
+  std::cout << command.output << std::flush;
+  std::cerr << command.complaint;
+  if (!command.options) {
+    return command.exitStatus;
+  }
+  Setup setup{*command.options, {}, {}};
+  return serve(setup);
+}
