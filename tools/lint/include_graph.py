@@ -21,6 +21,8 @@ FLOORS = (
     ("service/TarnReportingWorkerClasses.cpp", "classes"),
     ("service/TarnReportingService*", "front"),
     ("service/TarnReportingClient*", "front"),
+    ("service/TarnReportingSession*", "front"),
+    ("service/TarnReportingDecliningWorkers.h", "front"),
     ("service/TarnReportingWorkerClasses.h", "front"),
     ("service/*", "vocabulary"),
     ("session/*", "session"),
