@@ -1,0 +1,114 @@
+"""Installs the build into a folder of its own and looks at what came: files, programs, units, the client package."""
+
+import argparse
+import os
+import shutil
+import subprocess
+import sys
+import tempfile
+import unittest
+
+PROGRAMS = ("tarnreportingd", "tarnreportingctl")
+FILES = (
+    "lib/systemd/system/tarnreportingd.service", "lib/systemd/system/tarnreportingd.socket",
+    "lib/sysusers.d/tarnreporting.conf", "lib/tmpfiles.d/tarnreporting.conf",
+    "etc/tarnreporting/tarnreportingd.toml", "share/doc/tarnkit/LICENSE", "share/doc/tarnkit/README.md",
+    "share/doc/tarnkit/operations.md", "share/doc/tarnkit/wire.md",
+    "include/tarnkit/client/TarnReportingClient.h", "include/tarnkit/wire/Operation.h", "include/tarnkit/plist/Value.h",
+)
+LIBRARIES = ("libtarn_client.a", "libtarn_wire.a", "libtarn_plist.a", "cmake/tarnkit/tarnkit-config.cmake",
+             "cmake/tarnkit/tarnkit-config-version.cmake")
+
+options = argparse.Namespace()
+
+
+def run(*command):
+    return subprocess.run(command, capture_output=True, text=True, stdin=subprocess.DEVNULL)
+
+
+class InstalledTree(unittest.TestCase):
+    @classmethod
+    def setUpClass(cls):
+        cls.folder = tempfile.mkdtemp(prefix="tarn installed ")
+        cls.addClassCleanup(shutil.rmtree, cls.folder)
+        cls.prefix = os.path.join(cls.folder, "prefix")
+        done = run("cmake", "--install", options.build, "--prefix", cls.prefix)
+        assert done.returncode == 0, done.stdout + done.stderr
+
+    def at(self, *parts):
+        return os.path.join(self.prefix, *parts)
+
+    def test_every_file_is_in_its_place(self):
+        for path in [*FILES, *(f"{options.libdir}/{name}" for name in LIBRARIES)]:
+            with self.subTest(path):
+                self.assertTrue(os.path.getsize(self.at(path)) > 0)
+
+    def test_the_programs_start_and_tell_their_help(self):
+        for name in PROGRAMS:
+            with self.subTest(name):
+                done = run(self.at("bin", name), "--help")
+                self.assertEqual(done.returncode, 0, done.stderr)
+                self.assertIn("--socket", done.stdout)
+
+    def test_the_service_takes_the_example_configuration(self):
+        # It gets past the configuration and fails at a state directory that can't be one.
+        done = run(self.at("bin", "tarnreportingd"), "--config", self.at("etc/tarnreporting/tarnreportingd.toml"),
+                   "--state-dir", os.path.join(self.prefix, "etc/tarnreporting/tarnreportingd.toml/none"),
+                   "--socket", os.path.join(self.folder, "none.sock"))
+        self.assertEqual(done.returncode, 1, done.stderr)
+
+    def test_every_shown_key_of_the_example_configuration_has_its_default(self):
+        with open(self.at("etc/tarnreporting/tarnreportingd.toml"), encoding="utf-8") as file:
+            lines = file.read().splitlines()
+        keys = [line[1:] for line in lines if line.startswith("#") and not line.startswith("# ") and "=" in line]
+        self.assertEqual(len(keys), 11)
+        shown = os.path.join(self.folder, "shown.toml")
+        with open(shown, "w", encoding="utf-8") as file:
+            file.write("\n".join(line[1:] if line[1:] in keys else line for line in lines) + "\n")
+        done = run(self.at("bin", "tarnreportingd"), "--config", shown, "--state-dir", shown + "/none",
+                   "--socket", os.path.join(self.folder, "none.sock"))
+        self.assertEqual(done.returncode, 1, done.stderr)
+
+    def test_the_units_name_what_the_service_needs(self):
+        service = self.settings("lib/systemd/system/tarnreportingd.service")
+        self.assertEqual(service["Type"], ["notify"])
+        self.assertEqual(service["StateDirectory"], ["tarnreporting"])
+        self.assertRegex(service["WatchdogSec"][0], r"^[1-9][0-9]*s$")
+        program, *arguments = service["ExecStart"][0].split()
+        self.assertEqual((os.path.isabs(program), os.path.basename(program)), (True, "tarnreportingd"))
+        self.assertNotIn("@", " ".join(arguments))
+        sockets = self.settings("lib/systemd/system/tarnreportingd.socket")
+        self.assertEqual((sockets["ListenStream"], sockets["SocketMode"]), (["/run/tarnreporting/socket"], ["0660"]))
+        # The user that both name is the one that the snippet makes.
+        with open(self.at("lib/sysusers.d/tarnreporting.conf"), encoding="utf-8") as file:
+            self.assertIn("u " + service["User"][0] + " ", file.read())
+        self.assertEqual(sockets["SocketUser"], service["User"])
+
+    def settings(self, path):
+        found = {}
+        with open(self.at(path), encoding="utf-8") as file:
+            for line in file.read().splitlines():
+                if line and line[0] not in "#[":
+                    key, value = line.split("=", 1)
+                    found.setdefault(key, []).append(value)
+        return found
+
+    def test_a_stranger_builds_against_the_client_library(self):
+        build = os.path.join(self.folder, "consumer")
+        done = run("cmake", "-S", options.consumer, "-B", build, "-G", "Ninja", f"-DCMAKE_PREFIX_PATH={self.prefix}",
+                   f"-DCMAKE_CXX_COMPILER={options.compiler}")
+        self.assertEqual(done.returncode, 0, done.stdout + done.stderr)
+        done = run("cmake", "--build", build)
+        self.assertEqual(done.returncode, 0, done.stdout + done.stderr)
+        absent = os.path.join(self.folder, "absent.sock")
+        done = run(os.path.join(build, "consumer"), absent)
+        self.assertEqual(done.returncode, 0, done.stdout + done.stderr)
+        self.assertIn(absent, done.stdout)
+
+
+if __name__ == "__main__":
+    parser = argparse.ArgumentParser()
+    for name in ("build", "consumer", "compiler", "libdir"):
+        parser.add_argument("--" + name, required=True)
+    options, rest = parser.parse_known_args()
+    unittest.main(argv=[sys.argv[0], *rest])
