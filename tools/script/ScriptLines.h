@@ -1,0 +1,50 @@
+// ScriptLines: the lines of a script that is read as it comes, so that a script of any length needs no more memory than
+// its longest line.
+//
+// Owned by whoever plays the script, who waits for the descriptor and calls fill(). Threads: one at a time.
+#pragma once
+
+#include <cstddef>
+#include <string>
+#include <string_view>
+
+namespace tarn::script {
+
+class ScriptLines {
+ public:
+  // A longer line is refused: no request may be as long.
+  static constexpr std::size_t kMaxLineBytes = std::size_t{16} << 20U;
+
+  enum class Next {
+    Line,        // the line is there
+    Incomplete,  // fill() has to bring more
+    End,         // there are no more lines
+    TooLong,     // the next line is longer than kMaxLineBytes
+  };
+
+  // Reads from `fd`, which stays the caller's.
+  explicit ScriptLines(int fd) : fd_(fd) {}
+  ScriptLines(const ScriptLines&) = delete;
+  ScriptLines& operator=(const ScriptLines&) = delete;
+
+  // The next line without its line end; valid until the next call of either. The last line needs no line end.
+  Next next(std::string_view& line);
+  // Reads once, waiting when there is nothing yet. On failure false, and error() says why.
+  bool fill();
+
+  // Number of the line that next() gave last, or found too long; the first is 1.
+  std::size_t lineNumber() const noexcept { return lineNumber_; }
+  const std::string& error() const noexcept { return error_; }
+  int fd() const noexcept { return fd_; }
+
+ private:
+  int fd_;
+  std::string buffer_;
+  std::size_t begin_ = 0;    // of the next line
+  std::size_t scanned_ = 0;  // no line end lies before it
+  std::size_t lineNumber_ = 0;
+  bool ended_ = false;
+  std::string error_;
+};
+
+}  // namespace tarn::script
