@@ -1,0 +1,165 @@
+#include <poll.h>
+#include <unistd.h>
+
+#include <CLI/CLI.hpp>
+#include <chrono>
+#include <csignal>
+#include <memory>
+
+#include "platform/recorder/EventReader.h"
+#include "tools/ctl/Command.h"
+#include "tools/ctl/EventText.h"
+#include "tools/ctl/ExitStatus.h"
+#include "tools/ctl/Output.h"
+
+namespace tarn::ctl {
+
+namespace {
+
+using recorder::EventReader;
+
+struct Arguments {
+  recorder::EventQuery query;
+  std::string backend;
+  std::string nameGlob;
+  bool follow = false;
+  bool asJson = false;
+};
+
+volatile std::sig_atomic_t stopRequested = 0;
+
+void requestStop(int /*signal*/) {
+  stopRequested = 1;
+}
+
+// SIGINT and SIGTERM end a tail as its reader wishes, which is no failure.
+void stopOnSignals() {
+  struct sigaction action {};
+  action.sa_handler = requestStop;
+  ::sigaction(SIGINT, &action, nullptr);
+  ::sigaction(SIGTERM, &action, nullptr);
+}
+
+// Whether anybody still reads what is printed; a pipe whose reader left says so without anything being written.
+bool outputIsWanted() {
+  pollfd polled{STDOUT_FILENO, 0, 0};
+  return ::poll(&polled, 1, 0) <= 0 || (polled.revents & POLLERR) == 0;
+}
+
+class EventPrinter {
+ public:
+  EventPrinter(const Context& context, const Arguments& arguments)
+      : path_(context.stateDirectory + "/recorder.sqlite3"), arguments_(arguments), reader_(path_) {}
+
+  int print();
+
+ private:
+  // Prints what is there beyond the last one. False when it can't be read.
+  bool printNew();
+  void printRow(const recorder::EventRow& row);
+
+  static constexpr std::chrono::milliseconds kPatience{200};  // as long a signal may go unnoticed
+
+  const std::string path_;
+  const Arguments& arguments_;
+  EventReader reader_;
+  Output output_{STDOUT_FILENO};
+  std::int64_t after_ = 0;
+  bool isMissing_ = false;
+  bool headingIsPrinted_ = false;
+};
+
+int EventPrinter::print() {
+  after_ = arguments_.query.after;
+  if (!printNew()) {
+    return kFailure;
+  }
+  if (isMissing_ && !arguments_.follow) {
+    complain("there are no events: " + printable(path_) + " is not there");
+    return kFailure;
+  }
+  while (arguments_.follow && stopRequested == 0 && output_.good() && outputIsWanted()) {
+    if (reader_.waitForChange(kPatience) && !printNew()) {
+      return kFailure;
+    }
+  }
+  return output_.status();
+}
+
+bool EventPrinter::printNew() {
+  recorder::EventQuery query = arguments_.query;
+  EventReader::Result result;
+  do {
+    query.after = after_;
+    result = reader_.read(query);
+    if (result.status == EventReader::Status::Failed) {
+      complain("can't read " + printable(path_) + ": " + printable(result.error));
+      return false;
+    }
+    isMissing_ = result.status == EventReader::Status::Missing;
+    if (isMissing_) {
+      return true;
+    }
+    for (const recorder::EventRow& row : result.rows) {
+      printRow(row);
+    }
+    after_ = result.lookedUpTo;
+  } while (result.more && output_.good() && stopRequested == 0);
+  return true;
+}
+
+void EventPrinter::printRow(const recorder::EventRow& row) {
+  if (arguments_.asJson) {
+    output_.line(eventJson(row));
+    return;
+  }
+  if (!headingIsPrinted_) {
+    headingIsPrinted_ = true;
+    output_.line(eventHeading());
+  }
+  output_.line(eventLine(row));
+}
+
+int events(const Context& context, Arguments& arguments, bool hasBackend, bool hasName) {
+  if (!isNamed(context.stateDirectory, "--state-dir")) {
+    return kWrongUsage;
+  }
+  if (hasBackend) {
+    arguments.query.backend = arguments.backend;
+  }
+  if (hasName) {
+    arguments.query.nameGlob = arguments.nameGlob;
+  }
+  if (arguments.follow) {
+    stopOnSignals();
+  }
+  return EventPrinter(context, arguments).print();
+}
+
+}  // namespace
+
+void addEventsCommand(CLI::App& app, Context& context) {
+  CLI::App* command = app.add_subcommand("events", "Print what the back-ends received");
+  const auto arguments = std::make_shared<Arguments>();
+  command->add_flag("--follow", arguments->follow, "Print what is there, then what comes, until interrupted");
+  command->add_option("--backend", arguments->backend, "Only events of this back-end (tally, wattlog, ...)")
+      ->type_name("B");
+  command->add_option("--name", arguments->nameGlob, "Only events whose name matches this pattern (*, ?, [a-z])")
+      ->type_name("GLOB");
+  command->add_option("--after", arguments->query.after, "Only events with greater ids")->type_name("ID");
+  command->add_flag("--json", arguments->asJson, "Print one object a line: id, time, backend, name, payload, detail");
+  command->footer(
+      "\nReads the recorder in the state directory; the service need not run.\n\n"
+      "Examples:\n"
+      "  tarnreportingctl events --name '*.Summary'\n"
+      "  tarnreportingctl events --follow --json | jq .payload.audiotag");
+  command->callback([&context, command, arguments] {
+    const bool hasBackend = command->count("--backend") > 0;
+    const bool hasName = command->count("--name") > 0;
+    context.chosen = [&context, arguments, hasBackend, hasName] {
+      return events(context, *arguments, hasBackend, hasName);
+    };
+  });
+}
+
+}  // namespace tarn::ctl

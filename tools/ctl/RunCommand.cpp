@@ -1,0 +1,88 @@
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <CLI/CLI.hpp>
+#include <cerrno>
+#include <memory>
+#include <system_error>
+
+#include "tools/ctl/Command.h"
+#include "tools/ctl/ExitStatus.h"
+#include "tools/ctl/Output.h"
+#include "tools/ctl/ScriptPlayer.h"
+
+namespace tarn::ctl {
+
+namespace {
+
+constexpr const char* kHelp = R"(
+A script is one JSON object a line; blank lines are passed over.
+  "op"      createReportingSession, setServiceType, getServiceNameForReporterID, setConfiguration,
+            startReportingSessionForID, sendMessage, stopReportingSessionForID, destroyReportingSession,
+            reporterID, getAllReporters, killService; sleep ("seconds"), disconnect
+  "client"  the connection, "main" when left out; each name is a connection of its own
+  arguments "reporterID", "serviceType", "configuration", "message", "category", "type", "reporterIDs" (left out:
+            every running session); categories, types and service types by number or name
+  values    JSON integers are integers, other numbers doubles; {"$date": seconds} is a date,
+            {"$data": "base64"} is data
+
+Each line waits for its reply, except a start (its reply comes at the stop) and killService (it has none). Replies are
+printed as they arrive, one JSON object a line: client, line, op, error, result. A reply that carries an error is a
+reply like any other. A bad line stops the script: FILE:LINE, what is wrong and what was expected, exit 65.
+
+Example:
+  tarnreportingctl run <<'END'
+  {"op": "createReportingSession", "reporterID": 7}
+  {"op": "setServiceType", "reporterID": 7, "serviceType": "longformaudio"}
+  {"op": "startReportingSessionForID", "reporterID": 7}
+  {"op": "sendMessage", "reporterIDs": [7], "category": "Playback", "type": "Start", "message": {"volume": 0.5}}
+  {"op": "stopReportingSessionForID", "reporterID": 7}
+  END)";
+
+// Closes what it opened.
+class InputFile {
+ public:
+  explicit InputFile(const std::string& path)
+      : isStandardInput_(path == "-"),
+        fd_(isStandardInput_ ? STDIN_FILENO : ::open(path.c_str(), O_RDONLY | O_CLOEXEC)) {}
+  ~InputFile() {
+    if (!isStandardInput_ && fd_ >= 0) {
+      ::close(fd_);
+    }
+  }
+  InputFile(const InputFile&) = delete;
+  InputFile& operator=(const InputFile&) = delete;
+
+  int fd() const { return fd_; }
+  bool isStandardInput() const { return isStandardInput_; }
+
+ private:
+  bool isStandardInput_;
+  int fd_;
+};
+
+int run(const Context& context, const std::string& path) {
+  if (!isNamed(context.socket, "--socket")) {
+    return kWrongUsage;
+  }
+  const InputFile file(path);
+  if (file.fd() < 0) {
+    complain("can't open the script " + printable(path) + ": " + std::generic_category().message(errno));
+    return kBadInput;
+  }
+  Output output(STDOUT_FILENO);
+  ScriptPlayer player(context.socket, file.isStandardInput() ? "stdin" : path, output);
+  return player.play(file.fd());
+}
+
+}  // namespace
+
+void addRunCommand(CLI::App& app, Context& context) {
+  CLI::App* command = app.add_subcommand("run", "Play a script against the service and print each reply");
+  const auto path = std::make_shared<std::string>("-");
+  command->add_option("FILE", *path, "The script; standard input when left out or -");
+  command->footer(kHelp);
+  command->callback([&context, path] { context.chosen = [&context, path] { return run(context, *path); }; });
+}
+
+}  // namespace tarn::ctl

@@ -1,0 +1,77 @@
+// ScriptPlayer: plays a script against the service and prints each reply when it arrives.
+//
+// Each client name of the script is a connection of its own, made at its first line. A line waits for its reply before
+// the next one, but for two: the reply to a start is held by the service until the session stops, and killService has
+// none. So that a line on one connection still finds what a start on another one began, the player makes sure that the
+// start was served before it turns to the other (with a request whose reply is not printed).
+//
+// While it waits, for a reply, for the script's next line or for a sleep to end, replies of all connections are
+// printed. Memory does not grow with the script. Threads: one.
+#pragma once
+
+#include <chrono>
+#include <cstddef>
+#include <map>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "client/TarnReportingClient.h"
+#include "tools/ctl/Output.h"
+#include "tools/script/ScriptLines.h"
+#include "tools/script/ScriptStep.h"
+
+namespace tarn::ctl {
+
+class ScriptPlayer {
+ public:
+  // `scriptName` is the script's name in complaints.
+  ScriptPlayer(std::string socketPath, std::string scriptName, Output& output);
+  ScriptPlayer(const ScriptPlayer&) = delete;
+  ScriptPlayer& operator=(const ScriptPlayer&) = delete;
+
+  // Plays what `fd` yields to its end and closes the connections. Returns the exit status; what stopped the script
+  // early was said on stderr.
+  int play(int fd);
+
+ private:
+  using Clock = std::chrono::steady_clock;
+  struct Connection {
+    std::string lossReason;
+    bool startIsUnserved = false;  // a start was sent and nothing answered since
+    std::unique_ptr<client::TarnReportingClient> client;
+  };
+
+  // Each returns whether the script goes on; when not, status_ and stderr say why.
+  bool playLines(int fd);
+  bool playLine(std::string_view text, std::size_t line);
+  bool playStep(const script::ScriptStep& step);
+  bool playRequest(const script::ScriptStep& step);
+  bool sleep(double seconds);
+  bool disconnect(const std::string& name);
+  bool finish();
+  Connection* connect(const std::string& name);
+  // Waits until every start on connections other than `except` was served.
+  bool settleStarts(const Connection* except);
+  bool settle(const std::string& name, Connection& connection);
+  bool waitForReply(const std::string& name, Connection& connection, const bool& done);
+
+  // Waits until something happens on a connection or `inputFd` (-1: none) can be read, at most until `deadline`.
+  bool pump(std::optional<Clock::time_point> deadline, int inputFd = -1, bool* inputIsReady = nullptr);
+  bool waitForInput(int fd);
+  bool checkConnections();
+  void printReply(const script::ScriptStep& step, const client::Reply& reply);
+  bool stopForLoss(const std::string& name, const Connection& connection);
+  bool stop(int status, const std::string& why);
+
+  const std::string socketPath_;
+  const std::string scriptName_;
+  Output& output_;
+  std::map<std::string, Connection> connections_;
+  std::size_t line_ = 0;
+  bool serviceWasKilled_ = false;  // lost connections are what the script asked for
+  int status_ = 0;
+};
+
+}  // namespace tarn::ctl

@@ -1,0 +1,13 @@
+// SilentLog: for facilities that also return what went wrong: the command says it on stderr, once. Threads: any.
+#pragma once
+
+#include "platform/Log.h"
+
+namespace tarn::ctl {
+
+class SilentLog final : public platform::Log {
+ public:
+  void write(const platform::LogEntry& /*entry*/) noexcept override {}
+};
+
+}  // namespace tarn::ctl
