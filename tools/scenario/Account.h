@@ -1,0 +1,16 @@
+// Account: the readable story of what arrived: for each back-end what it got, for each session what became of it.
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "tools/scenario/Model.h"
+#include "tools/scenario/Recorded.h"
+
+namespace tarn::scenario {
+
+// Both print to stdout.
+void printBackends(const std::vector<RecordedEvent>& events);
+void printSessions(const std::vector<Expectation>& expectations, const std::vector<RecordedEvent>& events);
+
+}  // namespace tarn::scenario

@@ -1,0 +1,50 @@
+// Comparison: sets what the recorder holds against what must be there, and says of each difference exactly what it is.
+#pragma once
+
+#include <map>
+#include <string>
+#include <vector>
+
+#include "tools/scenario/Model.h"
+#include "tools/scenario/Recorded.h"
+
+namespace tarn::scenario {
+
+// What can only be known by having played the scripts.
+struct Circumstances {
+  double startedAt = 0;  // epoch seconds
+  double endedAt = 0;
+  std::string clientProcessName;  // of every client
+};
+
+class Comparison {
+ public:
+  Comparison(const std::vector<Expectation>& expectations, const Circumstances& circumstances)
+      : expectations_(expectations), circumstances_(circumstances) {}
+
+  // Each adds what differs to differences().
+  void compareEvents(const std::vector<RecordedEvent>& events);
+  void compareLedger(const json& ledger, std::size_t eventCount);
+  // `replies`: what the client that played the script printed.
+  void compareReplies(const Expectation& expectation, const std::vector<json>& replies);
+
+  const std::vector<std::string>& differences() const { return differences_; }
+  // How many events were found where they must be.
+  std::size_t matched() const { return matched_; }
+
+ private:
+  using Lane = std::vector<const RecordedEvent*>;
+  void compareLane(const std::string& application, const std::vector<ExpectedEvent>& expected, const Lane& found);
+  void compareUptimes(const Lane& found);
+  std::string differenceOf(const ExpectedEvent& expected, const RecordedEvent& found) const;
+  bool takeFreshStamp(json& payload, const std::string& key) const;
+  std::string takeMachineFacts(json& payload) const;
+  bool isClientName(const json& name) const;
+
+  const std::vector<Expectation>& expectations_;
+  const Circumstances circumstances_;
+  std::vector<std::string> differences_;
+  std::size_t matched_ = 0;
+};
+
+}  // namespace tarn::scenario

@@ -1,0 +1,51 @@
+// Model: what the recorder must hold after some scripts were played, worked out from the scripts alone.
+//
+// A second, plain telling of the service's rules on plain JSON: sessions by ID, markers, clean-up, redundancy by a walk
+// over the log, summaries. It shares no code with the service. It knows what has no effect on other scripts only: a
+// message for every running session, in a script that is played together with others, is refused.
+#pragma once
+
+#include <cstdint>
+#include <map>
+#include <memory>
+#include <nlohmann/json.hpp>
+#include <optional>
+#include <string>
+#include <vector>
+
+namespace tarn::scenario {
+
+using nlohmann::json;
+
+struct ExpectedEvent {
+  std::string name;
+  json payload;        // without the stamp when that is made by the service
+  std::string origin;  // FILE:LINE, or what else made it
+  bool hasFreshStamp = false;
+  bool isSummary = false;  // carries facts about the machine besides
+};
+
+struct ExpectedReply {
+  std::size_t line = 0;
+  std::optional<json> result;  // nothing: any
+};
+
+// What one script leads to.
+struct Expectation {
+  std::string script;
+  std::size_t messages = 0;
+  std::size_t deliveries = 0;  // to sessions
+  std::size_t redundant = 0;
+  std::size_t sessions = 0;
+  // By application name; within one, in this order.
+  std::map<std::string, std::vector<ExpectedEvent>> events;
+  // The least seconds that each connection is open.
+  std::vector<double> connections;
+  std::vector<ExpectedReply> replies;
+};
+
+// Plays `path` in the mind. `alone`: no other script is played at the same time. Throws std::runtime_error with the
+// line for what can't be predicted.
+Expectation expectationOf(const std::string& path, bool alone);
+
+}  // namespace tarn::scenario

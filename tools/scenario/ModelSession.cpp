@@ -1,0 +1,177 @@
+#include "tools/scenario/ModelSession.h"
+
+#include <algorithm>
+#include <chrono>
+
+#include "tools/scenario/Vocabulary.h"
+
+namespace tarn::scenario {
+
+namespace {
+
+constexpr const char* kStamp = "tarnreporting_timestamp";
+constexpr double kYearSeconds = 365.0 * 86400;
+
+double now() {
+  return std::chrono::duration<double>(std::chrono::system_clock::now().time_since_epoch()).count();
+}
+
+// Whether the service puts its own stamp in.
+bool mendStamp(json& payload) {
+  const auto stamp = payload.find(kStamp);
+  if (stamp == payload.end()) {
+    payload["invalid_timestamp"] = "nil";
+    return true;
+  }
+  if (stamp->get<double>() >= now() - kYearSeconds) {
+    return false;
+  }
+  payload["invalid_timestamp"] = *stamp;
+  payload.erase(kStamp);
+  return true;
+}
+
+json withoutBlanksInKeys(const json& payload) {
+  json mended = json::object();
+  for (const auto& [key, value] : payload.items()) {
+    if (key.find(' ') == std::string::npos) {
+      mended[key] = value;
+    }
+  }
+  for (const auto& [key, value] : payload.items()) {
+    if (key.find(' ') != std::string::npos) {
+      std::string name = key;
+      std::replace(name.begin(), name.end(), ' ', '_');
+      mended[name] = value;
+    }
+  }
+  return mended;
+}
+
+}  // namespace
+
+void ModelSession::configure(const json& configuration) {
+  const auto host = configuration.find("KvHostApplicationDisplayID");
+  if (host != configuration.end()) {
+    configuration_["HostApplicationDisplayID"] = *host;
+  }
+  configuration_.update(configuration);
+}
+
+ModelSession ModelSession::successor(std::uint16_t type) const {
+  ModelSession next;
+  next.configuration_ = configuration_;
+  next.type_ = type;
+  return next;
+}
+
+void ModelSession::start() {
+  appendMarker(1);
+  started_ = true;
+  forwards_ = true;
+}
+
+void ModelSession::stop(Expectation& expectation) {
+  appendMarker(2);
+  const json made = summary();
+  ++received_;
+  if (!isSingle_) {
+    json payload = made;
+    mendStamp(payload);
+    ExpectedEvent event;
+    event.origin = expectation.script + ", the summary of " + application();
+    event.hasFreshStamp = true;
+    event.isSummary = true;
+    forward(payload, 0x08000001U, 11, event, expectation);
+  }
+  log_.clear();
+  received_ = 0;
+  started_ = false;
+  forwards_ = false;
+}
+
+void ModelSession::receive(const json& message, std::uint32_t category, std::uint16_t type, const std::string& origin,
+                           Expectation& expectation) {
+  ++received_;
+  ++expectation.deliveries;
+  json payload = message;
+  ExpectedEvent event;
+  event.origin = origin;
+  event.hasFreshStamp = mendStamp(payload);
+  payload = withoutBlanksInKeys(payload);
+  payload["audiotag"] = categoryText(category) + typeText(type);
+  if (payload.value("HostApplicationDisplayID", std::string("Unknown")) == "Unknown") {
+    payload["HostApplicationDisplayID"] = application();
+  }
+  Record record{category, type, payload};
+  for (const char* key : {"processuptime_ms", "systemuptime_sec", kStamp}) {
+    record.compared.erase(key);
+  }
+  if (isRepeated(record)) {
+    ++expectation.redundant;
+    return;
+  }
+  log_.push_back(record);
+  if (started_ && !isSingle_) {
+    count(payload);
+  }
+  forward(payload, category, type, event, expectation);
+}
+
+bool ModelSession::isRepeated(const Record& record) const {
+  if (record.type == 6 || record.category == 11) {
+    return false;
+  }
+  for (auto earlier = log_.rbegin(); earlier != log_.rend(); ++earlier) {
+    if (earlier->category == record.category && earlier->type == record.type) {
+      return earlier->compared == record.compared;
+    }
+  }
+  return false;
+}
+
+void ModelSession::count(const json& payload) {
+  const auto duration = payload.find("session_duration");
+  if (duration != payload.end()) {
+    activeTime_ += duration->get<double>();
+    ++activeCount_;
+  } else if (payload.value("issue_type", json()) == "overload") {
+    ++overloads_;
+  }
+}
+
+void ModelSession::appendMarker(std::uint16_t type) {
+  log_.push_back({8, type, json("marker")});
+}
+
+void ModelSession::forward(const json& payload, std::uint32_t category, std::uint16_t type, ExpectedEvent event,
+                           Expectation& expectation) const {
+  if (!forwards_) {
+    return;
+  }
+  event.payload = payload;
+  event.payload["audiotag"] = categoryText(category) + typeText(type);
+  const std::string what = categoryText(category) + "." + typeText(type);
+  auto& lane = expectation.events[payload.at("HostApplicationDisplayID").get<std::string>()];
+  event.name = "sys.oxbow.tarnkit." + what;
+  lane.push_back(event);
+  event.name = "sys.oxbow." + serviceText(type_) + "." + what;
+  lane.push_back(event);
+}
+
+// As the service reads the counts: both markers are in the log by now.
+json ModelSession::summary() const {
+  const auto unique = static_cast<std::int64_t>(log_.size());
+  return {{"total_active_time", activeTime_},
+          {"active_count", activeCount_},
+          {"overload_count", overloads_},
+          {"average_active_time", activeCount_ == 0 ? 0.0 : activeTime_ / static_cast<double>(activeCount_)},
+          {"num_messages", received_},
+          {"num_unique_messages", unique},
+          {"num_redundant_messages", received_ - unique},
+          {"singleMessageSession", false},
+          {"summaryServiceName", serviceText(type_)},
+          {"HostApplicationDisplayID", application()}};
+}
+
+}  // namespace tarn::scenario

@@ -1,0 +1,58 @@
+// ModelSession: one session of the model: its log as a plain list, its counters, and the events that it leads to.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "tools/scenario/Model.h"
+
+namespace tarn::scenario {
+
+class ModelSession {
+ public:
+  explicit ModelSession(bool single = false) : isSingle_(single) {}
+
+  void configure(const json& configuration);
+  void setType(std::uint16_t type) { type_ = type; }
+  std::uint16_t type() const { return type_; }
+  bool started() const { return started_; }
+  std::string application() const { return configuration_.value("HostApplicationDisplayID", std::string("Unknown")); }
+  const json& configuration() const { return configuration_; }
+
+  // A session of the same ID that takes this one's place.
+  ModelSession successor(std::uint16_t type) const;
+  void start();
+  // Ends it; the summary joins the events.
+  void stop(Expectation& expectation);
+  void receive(const json& message, std::uint32_t category, std::uint16_t type, const std::string& origin,
+               Expectation& expectation);
+
+  std::size_t heldStartLine = 0;  // of the start that waits for its reply; 0: none
+
+ private:
+  struct Record {
+    std::uint32_t category;
+    std::uint16_t type;
+    json compared;  // the payload without stamps; a marker's is never equal to a message's
+  };
+  bool isRepeated(const Record& record) const;
+  void count(const json& payload);
+  void appendMarker(std::uint16_t type);
+  void forward(const json& payload, std::uint32_t category, std::uint16_t type, ExpectedEvent event,
+               Expectation& expectation) const;
+  json summary() const;
+
+  bool isSingle_;
+  bool started_ = false;
+  bool forwards_ = true;  // from its creation on, until it is stopped
+  std::uint16_t type_ = 0xFFFF;
+  json configuration_ = json::object();
+  std::vector<Record> log_;
+  std::int64_t received_ = 0;
+  double activeTime_ = 0;
+  std::int64_t activeCount_ = 0;
+  std::int64_t overloads_ = 0;
+};
+
+}  // namespace tarn::scenario
