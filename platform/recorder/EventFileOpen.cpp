@@ -2,7 +2,7 @@
 #include <sqlite3.h>
 #include <sys/stat.h>
 
-#include <cstring>
+#include <algorithm>
 #include <string>
 #include <system_error>
 #include <utility>
@@ -24,6 +24,8 @@ constexpr const char* kReadEventColumns =
 constexpr const char* kReadStateColumns =
     "SELECT group_concat(name || ' ' || type || ' ' || pk) "
     "FROM (SELECT * FROM pragma_table_info('recorder_state') ORDER BY cid)";
+
+constexpr const char* kMakeState = "CREATE TABLE recorder_state(name TEXT PRIMARY KEY, value INTEGER) WITHOUT ROWID";
 
 // Beyond this no id may lie: the rest of the range is what a recorder could ever need.
 constexpr std::int64_t kLastSaneId = std::int64_t{1} << 62;
@@ -112,17 +114,22 @@ Outcome EventFile::checkTables() {
   kinds.finalize();
   if (!hasAny) return makeTables();
 
-  const bool fits = !hasViews && connection_.text(kReadEventColumns) == kEventColumns &&
-                    connection_.text(kReadStateColumns).value_or("") == kStateColumns;
-  return fits ? Outcome::Done : refuse(Outcome::SetAside, "its tables are not those of a recorder");
+  const bool fits = !hasViews && connection_.text(kReadEventColumns) == kEventColumns;
+  const std::string state = connection_.text(kReadStateColumns).value_or("");
+  if (!fits || (!state.empty() && state != kStateColumns)) {
+    return refuse(Outcome::SetAside, "its tables are not those of a recorder");
+  }
+  // Events that somebody copied over without the recorder's own notes.
+  return state.empty() ? judge(connection_.run(kMakeState)) : Outcome::Done;
 }
 
 Outcome EventFile::makeTables() {
   // Whoever reads along learns from "begun_after" where the ids of a fresh file go on.
   const std::string sql =
-      "BEGIN IMMEDIATE;"
-      "CREATE TABLE events(id INTEGER PRIMARY KEY, time REAL, backend TEXT, name TEXT, payload TEXT, detail TEXT);"
-      "CREATE TABLE recorder_state(name TEXT PRIMARY KEY, value INTEGER) WITHOUT ROWID;"
+      std::string("BEGIN IMMEDIATE;") +
+      "CREATE TABLE events(id INTEGER PRIMARY KEY, time REAL, backend TEXT, name TEXT, payload TEXT, detail TEXT);" +
+      std::string(kMakeState) +
+      ";"
       "INSERT INTO recorder_state VALUES('begun_after', " +
       std::to_string(lastId_) + "), ('last_id', " + std::to_string(lastId_) + "); COMMIT";
   const int code = connection_.run(sql.c_str());

@@ -1,0 +1,140 @@
+#include "tests/recorder/RecorderFixture.h"
+
+namespace tarn::recorder {
+namespace {
+
+constexpr double kDay = 86'400;
+constexpr std::uintmax_t kMegabyte = 1 << 20;
+
+using RecorderRetention = RecorderFixture;
+
+TEST_F(RecorderRetention, FileStaysWithinItsSizeWhileEventsPourIn) {
+  options_.maxMegabytes = 2;
+  start();
+  std::uintmax_t largest = 0;
+  for (int round = 0; round < 40; ++round) {
+    recordMany(500, 1000);
+    ASSERT_TRUE(flush());
+    largest = std::max(largest, std::filesystem::file_size(file()));
+  }
+  stop();
+  EXPECT_LE(largest, 2 * kMegabyte + kMegabyte / 2);
+  EXPECT_LE(std::filesystem::file_size(file()), 2 * kMegabyte + kMegabyte / 2);
+  EXPECT_EQ(askOne(file(), "SELECT max(id) FROM events"), "20000");
+  EXPECT_GT(std::stol(askOne(file(), "SELECT count(*) FROM events")), 1000);
+}
+
+TEST_F(RecorderRetention, WriteAheadLogStaysBounded) {
+  options_.maxMegabytes = 2;
+  start();
+  std::uintmax_t largest = 0;
+  for (int round = 0; round < 60; ++round) {
+    recordMany(1000, 1000);
+    ASSERT_TRUE(flush());
+    largest = std::max(largest, std::filesystem::file_size(file().string() + "-wal"));
+  }
+  EXPECT_LE(largest, 24 * kMegabyte);
+}
+
+TEST_F(RecorderRetention, TheOldestGoFirstAndAreCounted) {
+  options_.maxMegabytes = 1;
+  start();
+  for (int round = 0; round < 10; ++round) {
+    recordMany(500, 1000);
+    ASSERT_TRUE(flush());
+  }
+  const RecorderCounters counters = recorder_->counters();
+  EXPECT_EQ(counters.committed, 5000U);
+  EXPECT_GT(counters.expired, 0U);
+  // What is left has no gaps, so only the oldest went.
+  EXPECT_EQ(askOne(file(), "SELECT max(id) - min(id) + 1 - count(*) FROM events"), "0");
+  EXPECT_EQ(askOne(file(), "SELECT 5000 - count(*) FROM events"), std::to_string(counters.expired));
+}
+
+TEST_F(RecorderRetention, EventsThatGrewTooOldGoWhileItRuns) {
+  options_.maxAgeDays = 30;
+  options_.maintenanceInterval = std::chrono::milliseconds(5);
+  start();
+  recordMany(1000);
+  ASSERT_TRUE(flush());
+  clock_.advance(std::chrono::hours(24 * 20));
+  recordMany(10);
+  ASSERT_TRUE(flush());
+  EXPECT_EQ(recorder_->counters().expired, 0U);
+  clock_.advance(std::chrono::hours(24 * 11));
+  EXPECT_TRUE(eventually([&] { return recorder_->counters().expired == 1000; }));
+  EXPECT_EQ(askOne(file(), "SELECT count(*), min(id) FROM events"), "10|1001");
+}
+
+TEST_F(RecorderRetention, AgeCountsFromTheEventsTimeToTheSecond) {
+  options_.maxAgeDays = 1;
+  clock_.setEpochSeconds(100 * kDay);
+  start();
+  recorder_->record("tally", "older", {}, {}, 99 * kDay - 1);
+  recorder_->record("tally", "justInTime", {}, {}, 99 * kDay);
+  ASSERT_TRUE(flush());
+  EXPECT_EQ(ask(file(), "SELECT name FROM events"), std::vector<std::string>{"justInTime"});
+}
+
+TEST_F(RecorderRetention, OldEventsOfEarlierRunsGoAtTheStart) {
+  start();
+  recordMany(5000);
+  stop();
+  clock_.advance(std::chrono::hours(24 * 31));
+  start();
+  EXPECT_TRUE(eventually([&] { return recorder_->counters().expired == 5000; }));
+}
+
+TEST_F(RecorderRetention, IdsAreNotUsedAgainWhenNothingIsLeft) {
+  options_.maintenanceInterval = std::chrono::milliseconds(5);
+  start();
+  recordMany(7);
+  ASSERT_TRUE(flush());
+  clock_.advance(std::chrono::hours(24 * 31));
+  ASSERT_TRUE(eventually([&] { return recorder_->counters().expired == 7; }));
+  stop();
+  ASSERT_EQ(askOne(file(), "SELECT count(*) FROM events"), "0");
+  start();
+  record("next");
+  ASSERT_TRUE(flush());
+  EXPECT_EQ(askOne(file(), "SELECT id FROM events"), "8");
+}
+
+TEST_F(RecorderRetention, FileShrinksWhenTheLimitCameDown) {
+  options_.maxMegabytes = 16;
+  start();
+  recordMany(10'000, 1000);
+  stop();
+  ASSERT_GT(std::filesystem::file_size(file()), 10 * kMegabyte);
+  options_.maxMegabytes = 2;
+  start();
+  EXPECT_TRUE(eventually([&] { return recorder_->counters().expired > 7000; }));
+  EXPECT_TRUE(eventually([&] { return std::stol(askOne(file(), "PRAGMA page_count")) * 8192 <= 2L << 20; }));
+  stop();
+  EXPECT_LE(std::filesystem::file_size(file()), 2 * kMegabyte);
+  EXPECT_EQ(askOne(file(), "PRAGMA integrity_check"), "ok");
+}
+
+TEST_F(RecorderRetention, CommitsGoOnWhileALotIsRemoved) {
+  options_.maxMegabytes = 64;
+  start();
+  for (int round = 0; round < 20; ++round) {
+    recordMany(2000, 1000);
+    ASSERT_TRUE(flush());
+  }
+  stop();
+  options_.maxMegabytes = 1;
+  start().waitUntilOpened();
+  std::vector<std::chrono::milliseconds> times;
+  for (int n = 0; n < 9; ++n) {
+    const auto before = std::chrono::steady_clock::now();
+    record("a");
+    ASSERT_TRUE(flush());
+    times.push_back(std::chrono::ceil<std::chrono::milliseconds>(std::chrono::steady_clock::now() - before));
+  }
+  std::sort(times.begin(), times.end());
+  EXPECT_LE(times[times.size() / 2], std::chrono::milliseconds(200));
+}
+
+}  // namespace
+}  // namespace tarn::recorder
