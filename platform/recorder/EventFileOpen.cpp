@@ -82,11 +82,13 @@ Outcome EventFile::openConnection() {
       },
       &logPages_);
   logPages_ = 0;
-  // The page size and the page map take hold only while the file is new.
+  if (connection_.integer("PRAGMA page_count") == 0) {
+    const int made = connection_.run("PRAGMA page_size=8192; PRAGMA auto_vacuum=INCREMENTAL");
+    if (made != SQLITE_OK) return judge(made);
+  }
   return judge(
-      connection_.run("PRAGMA page_size=8192; PRAGMA auto_vacuum=INCREMENTAL; PRAGMA journal_mode=WAL;"
-                      "PRAGMA synchronous=FULL; PRAGMA journal_size_limit=16777216; PRAGMA cache_size=-8192;"
-                      "PRAGMA secure_delete=OFF; PRAGMA trusted_schema=OFF"));
+      connection_.run("PRAGMA journal_mode=WAL; PRAGMA synchronous=FULL; PRAGMA journal_size_limit=16777216;"
+                      "PRAGMA cache_size=-8192; PRAGMA secure_delete=OFF; PRAGMA trusted_schema=OFF"));
 }
 
 Outcome EventFile::checkContent() {

@@ -33,6 +33,7 @@ void Recorder::shutdown() {
   {
     const Lock lock(mutex_);
     stopping_ = true;
+    refusing_ = true;  // from here on events are refused, or a hail of them would put the end off for ever
   }
   work_.notify_one();
   thread_.join();
@@ -45,7 +46,7 @@ void Recorder::record(std::string_view backend, std::string_view name, plist::Di
   {
     const Lock lock(mutex_);
     ++handedOver_;
-    if (stopped_) [[unlikely]] {
+    if (refusing_) [[unlikely]] {
       ++failed_;
       refused = !std::exchange(refusalLogged_, true);
     } else {
@@ -192,7 +193,6 @@ void Recorder::account(Lock& lock, std::size_t events, std::size_t bytes) {
 
 void Recorder::giveUp(Lock& lock) {
   const std::uint64_t lost = handedOver_ - committed_ - failed_;
-  stopped_ = true;
   failed_ += lost;
   waitingBytes_ = 0;
   incoming_.clear();

@@ -53,8 +53,9 @@ class Recorder {
   // Waits, once started, until the first attempt to open the file is over, which takes longest with a large file, as it
   // is read through.
   void waitUntilOpened();
-  // Commits what waits and closes the file; a disk that fails gets a few last tries, then what waits counts as failed.
-  // Called once, on the thread that called start(); the destructor does it otherwise.
+  // Commits what waits and closes the file, refusing what is handed over from now on; a disk that fails gets a few last
+  // tries, then what waits counts as failed. Called once, on the thread that called start(); the destructor does it
+  // otherwise.
   void shutdown();
 
   // Hands an event over, before start() too; `backend` must be a text that lives for ever, `time` is in epoch seconds.
@@ -111,7 +112,7 @@ class Recorder {
   bool asleep_ = false;  // the writer waits for the first event of a group
   bool opened_ = false;
   bool stopping_ = false;
-  bool stopped_ = false;
+  bool refusing_ = false;
   bool refusalLogged_ = false;
 };
 

@@ -17,14 +17,16 @@ class EventReaderTest : public RecorderFixture {
     for (const EventRow& row : result.rows) all.push_back(row.name);
     return all;
   }
-  void recordAs(std::string_view backend, const std::string& name) { recorder_->record(backend, name, {}, {}, 1.5); }
+  void recordAs(std::string_view backend, const std::string& name) {
+    recorder_->record(backend, name, {}, {}, clock_.epochSeconds());
+  }
 };
 
 using Names = std::vector<std::string>;
 
 TEST_F(EventReaderTest, RowsCarryEveryColumn) {
   start();
-  recorder_->record("wattlog", "audio", {{"a", 1}}, {{"agent", 28}}, 12.5);
+  recorder_->record("wattlog", "audio", {{"a", 1}}, {{"agent", 28}}, 1750000000.5);
   ASSERT_TRUE(flush());
   EventReader reader(file());
   const EventReader::Result result = reader.read({});
@@ -32,7 +34,7 @@ TEST_F(EventReaderTest, RowsCarryEveryColumn) {
   ASSERT_EQ(result.rows.size(), 1U);
   const EventRow& row = result.rows.front();
   EXPECT_EQ(row.id, 1);
-  EXPECT_EQ(row.time, 12.5);
+  EXPECT_EQ(row.time, 1750000000.5);
   EXPECT_EQ(row.backend, "wattlog");
   EXPECT_EQ(row.name, "audio");
   EXPECT_EQ(row.payload, R"({"a":1})");

@@ -15,12 +15,14 @@ namespace {
 
 // SQLite lets its system calls be replaced: every write of the process goes through here.
 std::atomic<int> writeError{0};          // what writes fail with; 0: they work
-std::atomic<bool> logsStillWork{false};  // then only writes into databases fail, not those into write-ahead logs
+std::atomic<bool> logsStillWork{false};  // then only writes into databases fail, not those into logs and their indexes
 
 bool isLog(int file) {
   char path[4096];
   const ssize_t size = ::readlink(("/proc/self/fd/" + std::to_string(file)).c_str(), path, sizeof path);
-  return size > 0 && std::string_view(path, static_cast<std::size_t>(size)).ends_with("-wal");
+  if (size <= 0) return false;
+  const std::string_view name(path, static_cast<std::size_t>(size));
+  return name.ends_with("-wal") || name.ends_with("-shm");
 }
 
 bool shouldFail(int file) {

@@ -72,7 +72,10 @@ TEST_F(RecorderStress, ShutdownDuringAHailOfEventsKeepsTheAccount) {
   start();
   std::atomic<bool> done{false};
   std::thread writer([this, &done] {
-    while (!done) record("a", {{"n", 1}});
+    while (!done) {
+      record("a", {{"n", 1}});
+      if (recorder_->isFull()) std::this_thread::yield();
+    }
   });
   ASSERT_TRUE(eventually([&] { return recorder_->counters().committed > 0; }));
   recorder_->shutdown();
