@@ -19,6 +19,14 @@ class SocketPauseTest : public testing::SocketFixture {
   std::size_t held() {
     return running_.onQueue([this] { return host_->gate.heldCount(); });
   }
+  // Steps that the loop makes until work that is delayed by this much runs.
+  std::uint64_t stepsWithin(std::chrono::milliseconds time) {
+    const auto before = running_.loop.progress().sample().steps;
+    std::promise<void> over;
+    running_.loop.queue()->asyncAfter(time, [&] { over.set_value(); });
+    over.get_future().get();
+    return running_.loop.progress().sample().steps - before;
+  }
 };
 
 TEST_F(SocketPauseTest, APausedConnectionStopsAtItsHeadRequestAndGoesOnLater) {
@@ -89,9 +97,7 @@ TEST_F(SocketPauseTest, APausedLoopSleepsAlthoughInputWaits) {
   auto& progress = running_.loop.progress();
   // A loop that spins over the unread input would make many thousands of steps in this time.
   ASSERT_TRUE(eventually([&] { return progress.sample().idle; }));
-  const auto before = progress.sample().steps;
-  std::this_thread::sleep_for(std::chrono::milliseconds(100));
-  EXPECT_LT(progress.sample().steps - before, 20u);
+  EXPECT_LT(stepsWithin(std::chrono::milliseconds(100)), 20u);
   resumeRequests();
   EXPECT_TRUE(client.reply());
   EXPECT_TRUE(client.reply());
@@ -108,9 +114,7 @@ TEST_F(SocketPauseTest, AClientThatLeavesWhilePausedIsServedThenInvalidated) {
   }
   auto& progress = running_.loop.progress();
   ASSERT_TRUE(eventually([&] { return progress.sample().idle; }));
-  const auto before = progress.sample().steps;
-  std::this_thread::sleep_for(std::chrono::milliseconds(50));
-  EXPECT_LT(progress.sample().steps - before, 20u);
+  EXPECT_LT(stepsWithin(std::chrono::milliseconds(50)), 20u);
   resumeRequests();
   ASSERT_TRUE(eventuallyHappens("1 invalidated"));
   EXPECT_EQ(events(), (std::vector<std::string>{"1 startReportingSessionForID 1", "1 startReportingSessionForID 2",
