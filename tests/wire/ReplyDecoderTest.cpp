@@ -1,0 +1,101 @@
+#include "wire/ReplyDecoder.h"
+
+#include <gtest/gtest.h>
+
+#include "tests/wire/Bytes.h"
+
+namespace tarn::wire {
+namespace {
+
+using testing::asBytes;
+using testing::fromHex;
+
+struct Outcome {
+  bool good = false;
+  DecodedReply reply;
+  std::string reason;
+};
+
+Outcome decode(std::string_view hex) {
+  ReplyDecoder decoder;
+  Outcome outcome;
+  outcome.good = decoder.decode(asBytes(fromHex(hex)), outcome.reply, outcome.reason);
+  return outcome;
+}
+
+TEST(ReplyDecoder, ReadsIDNullAndResults) {
+  const Outcome outcome = decode(
+      "851907d0f6f5"
+      "8201820203"
+      "a161610b");
+  ASSERT_TRUE(outcome.good) << outcome.reason;
+  EXPECT_EQ(outcome.reply.id, 2000U);
+  EXPECT_FALSE(outcome.reply.error.has_value());
+  ASSERT_EQ(outcome.reply.results.size(), 3U);
+  EXPECT_EQ(outcome.reply.results[0], plist::Value(true));
+  EXPECT_EQ(outcome.reply.results[1], plist::Value(plist::Array{1, plist::Array{2, 3}}));
+  EXPECT_EQ(outcome.reply.results[2], plist::Value(plist::Dictionary{{"a", 11}}));
+}
+
+TEST(ReplyDecoder, ReadsErrors) {
+  const Outcome outcome = decode(
+      "82"
+      "07"
+      "83"
+      "6161"
+      "21"
+      "6162");
+  ASSERT_TRUE(outcome.good) << outcome.reason;
+  ASSERT_TRUE(outcome.reply.error.has_value());
+  EXPECT_EQ(outcome.reply.error->domain, "a");
+  EXPECT_EQ(outcome.reply.error->code, -2);
+  EXPECT_EQ(outcome.reply.error->text, "b");
+}
+
+TEST(ReplyDecoder, RefusesWhatIsNoReplyAndSaysWhy) {
+  const std::pair<const char*, const char*> frames[] = {
+      {"", "not a reply array"},
+      {"00", "not a reply array"},
+      {"8107", "not a reply array"},
+      {"9f07f6ff", "not a reply array"},
+      {"8220f6", "not a reply array"},
+      {"8207f5", "an error that is neither null nor [domain, code, text]"},
+      {"82078261610"
+       "1",
+       "an error that is neither null nor [domain, code, text]"},
+      {"820783616101f6", "an error that is neither null nor [domain, code, text]"},
+      {"820783616161610161", "an error that is neither null nor [domain, code, text]"},
+      {"8307f6", "a result that is no property-list value"},
+      {"8307f6f6", "a result that is no property-list value"},
+      {"8307f6a26161016161"
+       "02",
+       "a result that is no property-list value"},
+      {"8307f681f7", "a result that is no property-list value"},
+      {"8207f600", "bytes behind the array"}};
+  for (const auto& [hex, reason] : frames) {
+    const Outcome outcome = decode(hex);
+    EXPECT_FALSE(outcome.good) << hex;
+    EXPECT_EQ(outcome.reason, reason) << hex;
+  }
+}
+
+TEST(ReplyDecoder, AnUnreadableReplyLeavesNothingForTheNext) {
+  ReplyDecoder decoder;
+  DecodedReply reply;
+  std::string reason;
+  const std::string bad = fromHex(
+      "8407f6"
+      "05"
+      "8281a1616105f6");
+  EXPECT_FALSE(decoder.decode(asBytes(bad), reply, reason));
+  const std::string good = fromHex(
+      "8308f6"
+      "8101");
+  ASSERT_TRUE(decoder.decode(asBytes(good), reply, reason));
+  EXPECT_EQ(reply.id, 8U);
+  ASSERT_EQ(reply.results.size(), 1U);
+  EXPECT_EQ(reply.results[0], plist::Value(plist::Array{1}));
+}
+
+}  // namespace
+}  // namespace tarn::wire
