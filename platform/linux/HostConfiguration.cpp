@@ -10,6 +10,7 @@
 
 #include "platform/linux/HostLog.h"
 #include "platform/linux/SmallFile.h"
+#include "plist/Json.h"
 
 namespace tarn::linux_host {
 
@@ -121,6 +122,11 @@ const Setting* findSetting(std::string_view section, std::string_view key) {
   return nullptr;
 }
 
+struct Fault {
+  std::uint64_t line = 0;
+  std::string text;
+};
+
 // Goes through the file's tables, which come in the order of their names, and keeps the complaint that stands first in
 // the file.
 class Reader {
@@ -140,10 +146,8 @@ class Reader {
       }
     }
   }
-  // The first complaint as "NAME:LINE: text"; empty when there is none.
-  std::string error(std::string_view name) const {
-    return text_.empty() ? std::string() : std::string(name) + ":" + std::to_string(line_) + ": " + text_;
-  }
+  // The first complaint; without a text when there is none.
+  const Fault& fault() const { return fault_; }
 
  private:
   void readSection(std::string_view section, const toml::table& table) {
@@ -163,32 +167,34 @@ class Reader {
   void complain(const toml::source_region& where, std::string_view before, std::string_view name,
                 std::string_view behind) {
     const std::uint64_t line = where.begin.line;
-    if (text_.empty() || line < line_) {
-      line_ = line;
-      text_ = std::string(before) + std::string(name) + std::string(behind);
+    if (fault_.text.empty() || line < fault_.line) {
+      fault_ = {line, std::string(before) + std::string(name) + std::string(behind)};
     }
   }
 
-  std::uint64_t line_ = 0;
-  std::string text_;
+  Fault fault_;
 };
 
 }  // namespace
 
 ReadConfiguration parseConfiguration(std::string_view text, std::string_view name) {
   const toml::parse_result parsed = toml::parse(text);
-  if (!parsed) {
-    const toml::parse_error& fault = parsed.error();
-    return {std::nullopt, std::string(name) + ":" + std::to_string(fault.source().begin.line) + ": " +
-                              std::string(fault.description())};
+  Fault fault;
+  HostConfiguration configuration;
+  if (parsed) {
+    Reader reader;
+    reader.readRoot(parsed.table());
+    fault = reader.fault();
+    configuration = std::move(reader.configuration);
+  } else {
+    fault = {parsed.error().source().begin.line, std::string(parsed.error().description())};
   }
-  Reader reader;
-  reader.readRoot(parsed.table());
-  std::string error = reader.error(name);
-  if (!error.empty()) {
-    return {std::nullopt, std::move(error)};
+  if (fault.text.empty()) {
+    return {std::move(configuration), {}};
   }
-  return {std::move(reader.configuration), {}};
+  std::string error = std::string(name) + ":" + std::to_string(fault.line) + ": ";
+  plist::appendEscapedControls(error, fault.text);  // keys may hold line ends, an error is one line
+  return {std::nullopt, std::move(error)};
 }
 
 ReadConfiguration readConfiguration(const std::string& path) {

@@ -3,7 +3,6 @@
 #include <fcntl.h>
 
 #include <cerrno>
-#include <chrono>
 #include <ctime>
 #include <functional>
 #include <optional>
@@ -23,7 +22,6 @@ constexpr std::string_view kModule = "JsonDefaultsStore";
 constexpr std::string_view kPreferencesUser = "mobile";
 constexpr std::size_t kMaximumCachedSuites = 64;
 constexpr unsigned kFolderMode = 0750;
-constexpr std::chrono::milliseconds kLockPatience{5000};
 // Files are stamped by a clock that moves in steps of some milliseconds: two changes within a step look alike.
 constexpr std::int64_t kSettlingNanoseconds = 100'000'000;
 
@@ -45,7 +43,8 @@ std::string parsed(const std::string& path, std::string_view text, plist::Dictio
 
 }  // namespace
 
-JsonDefaultsStore::JsonDefaultsStore(std::string folder, platform::Log& log) : folder_(std::move(folder)), log_(log) {}
+JsonDefaultsStore::JsonDefaultsStore(std::string folder, platform::Log& log, std::chrono::milliseconds lockPatience)
+    : folder_(std::move(folder)), log_(log), lockPatience_(lockPatience) {}
 
 plist::Value JsonDefaultsStore::value(std::string_view suiteName, std::string_view key) const {
   return suite(suiteName).values.get(key);
@@ -97,7 +96,7 @@ std::string JsonDefaultsStore::store(std::string_view suiteName, std::string_vie
     return folder_ + errorSuffix(error);
   }
   FileLock writers;
-  if (const int error = writers.take(folder_ + "/.lock", kLockPatience); error != 0) {
+  if (const int error = writers.take(folder_ + "/.lock", lockPatience_); error != 0) {
     return folder_ + "/.lock" + errorSuffix(error);
   }
   Stamp stamp;

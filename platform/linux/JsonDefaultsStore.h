@@ -3,7 +3,7 @@
 //   - A read sees what any process has written: the file is looked at each time and read anew when it has changed.
 //   - A write replaces the file whole, on disk before it returns, and reads it first under a lock that all writers
 //   take,
-//     so that writers of different keys lose nothing. A writer waits at most 5 seconds for the lock.
+//     so that writers of different keys lose nothing. A writer waits for the lock, but not longer than it is told to.
 //   - A file that can't be read or is no JSON object reads as empty and is logged with its line and column, once for
 //   each
 //     state of the file. It is never replaced: a write to it fails until somebody mends or removes it, because it may
@@ -16,6 +16,7 @@
 
 #include <sys/stat.h>
 
+#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <map>
@@ -33,7 +34,8 @@ class JsonDefaultsStore final : public platform::DefaultsStore {
   static constexpr std::size_t kMaximumFileBytes = std::size_t{1} << 20U;
 
   // `folder` holds the suites' files; it is made with the first write. The log must outlive the store.
-  JsonDefaultsStore(std::string folder, platform::Log& log);
+  JsonDefaultsStore(std::string folder, platform::Log& log,
+                    std::chrono::milliseconds lockPatience = std::chrono::seconds(5));
   JsonDefaultsStore(const JsonDefaultsStore&) = delete;
   JsonDefaultsStore& operator=(const JsonDefaultsStore&) = delete;
 
@@ -81,6 +83,7 @@ class JsonDefaultsStore final : public platform::DefaultsStore {
 
   const std::string folder_;
   platform::Log& log_;
+  const std::chrono::milliseconds lockPatience_;
   mutable std::mutex mutex_;
   mutable std::map<std::string, Cached, std::less<>> cache_;  // guarded by mutex_
 };

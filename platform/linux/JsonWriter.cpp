@@ -82,6 +82,9 @@ class Writer {
   }
   template <class Write>
   bool writeForm(std::string_view name, Write write) {
+    if (level_ == kMaximumJsonNesting) {
+      return false;
+    }
     out_ += "{\"";
     out_ += name;
     out_ += "\": ";

@@ -179,7 +179,8 @@ TEST_F(JsonDefaults, LockThatIsNeverFreedMakesTheWriteFail) {
   std::filesystem::create_directory(folder_.path("defaults"));
   const UniqueDescriptor holder(::open(folder_.path("defaults/.lock").c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0600));
   ASSERT_EQ(::flock(holder.get(), LOCK_EX), 0);
-  EXPECT_EQ(store_.store(kSuite, "n", 1), folder_.path("defaults/.lock") + ": Connection timed out");
+  JsonDefaultsStore hasty(folder_.path("defaults"), log_, std::chrono::milliseconds(20));
+  EXPECT_EQ(hasty.store(kSuite, "n", 1), folder_.path("defaults/.lock") + ": Connection timed out");
 }
 
 TEST_F(JsonDefaults, ReplacedFileKeepsItsMode) {

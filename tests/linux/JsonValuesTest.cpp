@@ -145,6 +145,12 @@ TEST(JsonValues, WhatWouldNotReadBackEqualIsNotWritten) {
     deep = plist::Array{deep};
   }
   EXPECT_FALSE(jsonText(deep));
+  plist::Array atLimit{plist::Date{1}};
+  for (int level = 1; level < 63; ++level) {
+    atLimit = plist::Array{atLimit};
+  }
+  EXPECT_TRUE(jsonText(atLimit));
+  EXPECT_FALSE(jsonText(plist::Array{atLimit}));  // the form of the date is a level of its own
 }
 
 TEST(JsonValues, Base64IsDecodedStrictly) {

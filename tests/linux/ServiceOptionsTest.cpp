@@ -70,7 +70,7 @@ TEST(ServiceOptions, EveryOptionIsTaken) {
 TEST(ServiceOptions, UsageErrorsAreOneLineThatNamesTheOption) {
   EXPECT_EQ(complaintOf({"--log-level", "loud"}),
             "tarnreportingd: --log-level: \"loud\" is none of debug, info, default, error\n");
-  EXPECT_EQ(complaintOf({"--socket="}), "tarnreportingd: --socket: must not be empty\n");
+  EXPECT_EQ(complaintOf({"--socket="}), "tarnreportingd: --socket: 1 required PATH missing\n");
   EXPECT_EQ(complaintOf({"--state-dir", ""}), "tarnreportingd: --state-dir: must not be empty\n");
   EXPECT_NE(complaintOf({"--config"}).find("--config"), std::string::npos);
   EXPECT_NE(complaintOf({"--loud"}).find("--loud"), std::string::npos);

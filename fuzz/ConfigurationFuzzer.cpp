@@ -1,0 +1,27 @@
+// Bytes as a configuration file: they give a configuration within its ranges or one line that names the file.
+#include <cstddef>
+#include <cstdint>
+#include <cstdlib>
+#include <string_view>
+
+#include "platform/linux/HostConfiguration.h"
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+  using namespace tarn::linux_host;
+  const ReadConfiguration read = parseConfiguration({reinterpret_cast<const char*>(data), size}, "c.toml");
+  if (!read.configuration) {
+    if (!read.error.starts_with("c.toml:") || read.error.find('\n') != std::string::npos) {
+      std::abort();
+    }
+    return 0;
+  }
+  const HostConfiguration& host = *read.configuration;
+  const bool inRange = host.rtc.startDelay.count() >= 0 && host.rtc.startDelay.count() <= 3'600'000 &&
+                       host.recorder.maximumMegabytes >= 1 && host.recorder.maximumMegabytes <= 1048576 &&
+                       host.recorder.maximumAgeDays >= 1 && host.recorder.maximumAgeDays <= 36500 &&
+                       host.limits.maximumFrameBytes >= 64 && host.limits.maximumFrameBytes <= 67108864;
+  if (!inRange || !read.error.empty()) {
+    std::abort();
+  }
+  return 0;
+}
