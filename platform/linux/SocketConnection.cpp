@@ -138,7 +138,9 @@ void SocketConnection::serveFrame(std::span<const std::byte> frame) {
 
 void SocketConnection::serveRequest(wire::DecodedRequest& request) {
   if (request.operation == wire::Operation::Status) {
-    sendReply(request.id, {host_.status()});
+    // Behind the work of the requests before it, whose outcome it tells.
+    host_.loop.queue()->async(
+        [self = shared_from_this(), id = request.id] { self->sendReply(id, {self->host_.status()}); });
   } else if (!host_.gate.open()) {
     heldRequest_ = std::move(request);
     host_.gate.hold(shared_from_this());

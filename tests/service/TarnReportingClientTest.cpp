@@ -1,0 +1,264 @@
+// The operations of the remote interface, as a client sees them.
+#include "tests/service/ServiceFixture.h"
+
+namespace tarn {
+namespace {
+
+using namespace testing;
+
+class RemoteOperations : public ServiceFixture {
+ protected:
+  RemoteOperations() : client_(connect(41)) {}
+
+  const Client client_;
+  Answer<bool> held_;
+};
+
+TEST_F(RemoteOperations, CreateMakesASessionOfTheClientsProcess) {
+  create(client_, -7);
+  const auto session = sessionOf(0, -7);
+  ASSERT_TRUE(session != nullptr);
+  EXPECT_EQ(session->processIdentifiers(), std::vector<std::int32_t>{41});
+  EXPECT_EQ(session->clientProcessName(), "player");
+  EXPECT_TRUE(platform_.log.contains("creating session for reporter -7"));
+  EXPECT_TRUE(platform_.log.contains("session created for reporter -7"));
+}
+
+TEST_F(RemoteOperations, CreatingTwiceUnderOneIDReplacesTheFirstWithoutStoppingIt) {
+  create(client_, 10);
+  start(client_, 10, held_);
+  create(client_, 10);
+  EXPECT_FALSE(sessionOf(0, 10)->started());
+  EXPECT_EQ(service_->sessionCount(), 1U);
+  EXPECT_EQ(events("sys.oxbow.tarnkit.Session_Generic.Summary"), 0U);
+  EXPECT_EQ(held_.count, 0);
+}
+
+TEST_F(RemoteOperations, StartReplyIsHeldUntilTheStop) {
+  create(client_, 10);
+  start(client_, 10, held_);
+  EXPECT_EQ(held_.count, 0);
+  EXPECT_TRUE(sessionOf(0, 10)->started());
+  stop(client_, 10);
+  EXPECT_EQ(held_.count, 1);
+  EXPECT_TRUE(held_.result);
+  EXPECT_FALSE(sessionOf(0, 10)->started());
+}
+
+TEST_F(RemoteOperations, StartOfAStartedSessionIsLostAndTheStopSendsTheFirstReply) {
+  create(client_, 10);
+  start(client_, 10, held_);
+  Answer<bool> second;
+  start(client_, 10, second);
+  EXPECT_EQ(sessionOf(0, 10)->messages().size(), 1U);  // not even a marker
+  stop(client_, 10);
+  EXPECT_EQ(held_.count, 1);
+  EXPECT_EQ(second.count, 0);
+}
+
+TEST_F(RemoteOperations, StartOfAnUnknownSessionIsAnsweredAtOnce) {
+  start(client_, 0, held_);
+  EXPECT_EQ(held_.count, 1);
+  start(client_, 99, held_);
+  EXPECT_EQ(held_.count, 2);
+  EXPECT_TRUE(held_.result);
+}
+
+TEST_F(RemoteOperations, StartAndStopReachOnlyTheClientsOwnSessions) {
+  const Client other = connect(42);
+  create(client_, 10);
+  start(other, 10, held_);
+  EXPECT_EQ(held_.count, 1);
+  EXPECT_FALSE(sessionOf(0, 10)->started());
+  start(client_, 10, held_);
+  stop(other, 10);
+  EXPECT_TRUE(sessionOf(0, 10)->started());
+}
+
+TEST_F(RemoteOperations, StopOfAnIdleOrUnknownSessionIsLoggedAndAnswered) {
+  create(client_, 10);
+  stop(client_, 10);
+  EXPECT_TRUE(platform_.log.contains(LogLevel::Error,
+                                     "Stop called, but session==nil or session.started==false. reporterID=10 "
+                                     "session=reporterID=10,serviceName=unknown,"));
+  stop(client_, 99);
+  EXPECT_TRUE(platform_.log.contains(
+      LogLevel::Error,
+      "Stop called, but session==nil or session.started==false. reporterID=99 session=(null) session.started=0"));
+  stop(client_, 0);
+  EXPECT_FALSE(platform_.log.contains("reporterID=0"));
+}
+
+TEST_F(RemoteOperations, ChangingTheTypeOfAStartedSessionReplacesItByAnUnstartedOne) {
+  create(client_, 10);
+  configure(client_, {{"HostApplicationDisplayID", "com.example.player"}}, 10);
+  start(client_, 10, held_);
+  send(client_, {{"volume", 0.5}}, std::vector<std::int64_t>{10});
+  const auto before = sessionOf(0, 10);
+  retype(client_, 3, 10);
+  const auto after = sessionOf(0, 10);
+  ASSERT_NE(before, after);
+  EXPECT_FALSE(after->started());
+  EXPECT_EQ(after->serviceType(), AudioServiceType::Haptics);
+  EXPECT_EQ(after->configuration()["HostApplicationDisplayID"].text(), "com.example.player");
+  EXPECT_EQ(after->previousValues().get("volume").asDouble(), 0.5);
+  EXPECT_EQ(after->clientProcessName(), "player");
+  stop(client_, 10);
+  EXPECT_TRUE(platform_.log.contains(LogLevel::Error, "Stop called, but session==nil or session.started==false."));
+  EXPECT_EQ(held_.count, 0);
+}
+
+TEST_F(RemoteOperations, SettingTheSameTypeKeepsTheSession) {
+  create(client_, 10);
+  retype(client_, 1, 10);
+  const auto session = sessionOf(0, 10);
+  retype(client_, 1, 10);
+  EXPECT_EQ(sessionOf(0, 10), session);
+  EXPECT_TRUE(platform_.log.contains("setting service type 1 for reporter 10"));
+  EXPECT_TRUE(platform_.log.contains("service type 1 set for reporter  10"));
+}
+
+TEST_F(RemoteOperations, TypeOfAnUnknownSessionAndOfIDZeroIsAnsweredWithSuccess) {
+  retype(client_, 1, 0);
+  retype(client_, 1, 99);
+  EXPECT_EQ(service_->sessionCount(), 0U);
+}
+
+TEST_F(RemoteOperations, TypeOfASessionIsToldAcrossClients) {
+  const Client other = connect(42);
+  create(client_, 10);
+  retype(client_, 4, 10);
+  EXPECT_EQ(serviceType(other, 10), 4);
+  EXPECT_EQ(serviceType(client_, 10), 4);
+}
+
+TEST_F(RemoteOperations, TypeOfAnUnknownIDIs65535) {
+  EXPECT_EQ(serviceType(client_, 99), 65535);
+  EXPECT_EQ(serviceType(client_, 0), 65535);
+}
+
+TEST_F(RemoteOperations, ConfigurationGoesToTheClientsOwnSession) {
+  const Client other = connect(42);
+  create(client_, 10);
+  configure(other, {{"a", 1}}, 10);
+  EXPECT_TRUE(sessionOf(0, 10)->configuration().empty());
+  configure(client_, {{"KvHostApplicationDisplayID", "com.example.player"}}, 10);
+  EXPECT_EQ(sessionOf(0, 10)->configuration()["HostApplicationDisplayID"].text(), "com.example.player");
+}
+
+TEST_F(RemoteOperations, DestroyStopsAStartedSessionAndLosesItsHeldReply) {
+  create(client_, 10);
+  start(client_, 10, held_);
+  destroy(client_, 10);
+  EXPECT_EQ(sessionOf(0, 10), nullptr);
+  EXPECT_EQ(events("sys.oxbow.tarnkit.Session_Generic.Summary"), 1U);
+  EXPECT_EQ(held_.count, 0);
+  destroy(client_, 10);
+  EXPECT_EQ(platform_.log.count("destroying session for reporter 10"), 2U);
+}
+
+TEST_F(RemoteOperations, ReporterIDTellsIDAndTypeOfAnyClientsSession) {
+  const Client other = connect(42);
+  create(client_, 10);
+  retype(client_, 2, 10);
+  Answer<plist::Dictionary> answer;
+  other.remote().reporterID(10, answer.reply());
+  platform_.runUntilIdle();
+  EXPECT_EQ(answer.result, (plist::Dictionary{{"reporterID", 10}, {"serviceType", 2}}));
+  other.remote().reporterID(99, answer.reply());
+  platform_.runUntilIdle();
+  EXPECT_EQ(answer.result, (plist::Dictionary{{"reporterID", 0}, {"serviceType", 65535}}));
+}
+
+TEST_F(RemoteOperations, AllReportersAreListedClientByClient) {
+  const Client other = connect(42);
+  create(other, 5);
+  create(client_, 10);
+  create(client_, 3);
+  Answer<std::vector<std::int64_t>> answer;
+  other.remote().getAllReporters(answer.reply());
+  platform_.runUntilIdle();
+  EXPECT_EQ(answer.result, (std::vector<std::int64_t>{10, 3, 5}));
+}
+
+TEST_F(RemoteOperations, MessageWhileReportingIsDisabledIsRefusedWithTheOneError) {
+  create(client_, 10);
+  service_->setReportingEnabled(false);
+  const auto error = send(client_, {{"a", 1}}, std::vector<std::int64_t>{10});
+  ASSERT_TRUE(error);
+  EXPECT_EQ(error->domain, "sys.oxbow.audio.reporting");
+  EXPECT_EQ(error->code, 1);
+  EXPECT_EQ(sessionOf(0, 10)->totalMessageCount(), 0);
+}
+
+TEST_F(RemoteOperations, MessageWithUnknownIDsIsDroppedBehindASuccess) {
+  EXPECT_FALSE(send(client_, {{"a", 1}}, std::vector<std::int64_t>{99}));
+  EXPECT_EQ(service_->sessionCount(), 0U);
+}
+
+TEST_F(RemoteOperations, MessageWithoutASessionIsMarkedOnInternalBuildsOnly) {
+  send(client_, {{"a", 1}}, std::nullopt);
+  EXPECT_FALSE(platform_.tally.events().at(0).payload.contains("sendSingleMessage"));
+}
+
+TEST_F(RemoteOperations, LogsTheListOfReportersOfAMessage) {
+  create(client_, 10);
+  send(client_, {{"a", 1}}, std::vector<std::int64_t>{10, 11});
+  EXPECT_TRUE(platform_.log.contains(LogLevel::Debug, "sending message for reporter (10, 11)"));
+  send(client_, {{"a", 1}}, std::nullopt);
+  EXPECT_TRUE(platform_.log.contains(LogLevel::Debug, "sending message for reporter (null)"));
+}
+
+TEST_F(RemoteOperations, KillServiceEndsTheProcessWithStatusTwo) {
+  client_.remote().killService();
+  platform_.runUntilIdle();
+  EXPECT_EQ(platform_.processControl.exitStatuses(), std::vector<int>{2});
+  EXPECT_TRUE(platform_.log.contains("DESTROYING SERVICE"));
+}
+
+TEST_F(RemoteOperations, RequestsAreServedInTheOrderOfArrival) {
+  Answer<bool> created;
+  Answer<std::uint16_t> type;
+  client_.remote().createReportingSession(10, created.reply());
+  client_.remote().setServiceType(3, 10, created.reply());
+  client_.remote().getServiceNameForReporterID(10, type.reply());
+  platform_.runUntilIdle();
+  EXPECT_EQ(type.result, 3);
+}
+
+// The same front on an internal build of the device.
+class InternalBuildOperations : public ServiceFixture {
+ protected:
+  InternalBuildOperations() { platform_.deviceProperties.set("InternalBuild", true); }
+};
+
+TEST_F(InternalBuildOperations, MessageWithoutASessionIsMarked) {
+  const Client client = connect(41);
+  send(client, {{"a", 1}}, std::nullopt);
+  EXPECT_TRUE(platform_.tally.events().at(0).payload["sendSingleMessage"].asBool());
+  create(client, 10);
+  send(client, {{"a", 1}}, std::vector<std::int64_t>{10});
+  EXPECT_FALSE(platform_.tally.events().back().payload.contains("sendSingleMessage"));
+}
+
+TEST_F(InternalBuildOperations, StartOfATestSessionIsAnsweredAtOnceAndAtTheStop) {
+  const Client client = connect(41);
+  Answer<bool> held;
+  create(client, 10);
+  retype(client, 11, 10);
+  start(client, 10, held);
+  EXPECT_EQ(held.count, 1);
+  stop(client, 10);
+  EXPECT_EQ(held.count, 2);  // the connection drops the second
+}
+
+TEST_F(InternalBuildOperations, StartOfAnyOtherSessionIsHeld) {
+  const Client client = connect(41);
+  Answer<bool> held;
+  create(client, 10);
+  start(client, 10, held);
+  EXPECT_EQ(held.count, 0);
+}
+
+}  // namespace
+}  // namespace tarn
