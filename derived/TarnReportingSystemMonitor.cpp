@@ -40,12 +40,20 @@ constexpr std::array<Feature, 3> kFeatures{{
     {"ringerstate", {}, "sys.oxbow.homeshell.ringerstate"},
 }};
 
-std::mutex sharedInstanceLock;
-std::shared_ptr<TarnReportingSystemMonitor> sharedInstance;  // guarded by sharedInstanceLock
+// The shared instance and the lock on it.
+struct Shared {
+  std::mutex lock;
+  std::shared_ptr<TarnReportingSystemMonitor> instance;
+};
+
+Shared& shared() {
+  static Shared theOne;
+  return theOne;
+}
 
 std::shared_ptr<TarnReportingSystemMonitor> currentInstance() {
-  const std::lock_guard guard(sharedInstanceLock);
-  return sharedInstance;
+  const std::lock_guard guard(shared().lock);
+  return shared().instance;
 }
 
 plist::Dictionary makeFeatures() {
@@ -77,16 +85,16 @@ plist::Value readFeature(std::string_view name, const plist::Dictionary& descrip
 
 // Whether two states of a feature say the same; when they were read doesn't count.
 bool sameState(const plist::Dictionary& a, const plist::Dictionary& b) {
-  static const std::array<plist::Key, 2> stamps{plist::Key(kTimestamp), plist::Key(kSystemUptime)};
-  return a.equalsIgnoring(b, stamps);
+  static const std::array<plist::Key, 2> kStamps{plist::Key(kTimestamp), plist::Key(kSystemUptime)};
+  return a.equalsIgnoring(b, kStamps);
 }
 
 }  // namespace
 
 void TarnReportingSystemMonitor::initializeWithQueue(std::shared_ptr<platform::WorkQueue> queue) {
-  const std::lock_guard guard(sharedInstanceLock);
-  if (sharedInstance == nullptr) {
-    sharedInstance = initWithQueue(std::move(queue));
+  const std::lock_guard guard(shared().lock);
+  if (shared().instance == nullptr) {
+    shared().instance = initWithQueue(std::move(queue));
   }
 }
 
@@ -107,10 +115,10 @@ std::vector<plist::Key> TarnReportingSystemMonitor::getSystemMonitorKeys() {
 
 void TarnReportingSystemMonitor::reset() {
   std::shared_ptr<TarnReportingSystemMonitor> instance;  // dies behind the lock
-  const std::lock_guard guard(sharedInstanceLock);
-  if (sharedInstance != nullptr) {
-    sharedInstance->clear();
-    instance = std::move(sharedInstance);
+  const std::lock_guard guard(shared().lock);
+  if (shared().instance != nullptr) {
+    shared().instance->clear();
+    instance = std::move(shared().instance);
   }
 }
 
@@ -132,7 +140,7 @@ plist::Dictionary TarnReportingSystemMonitor::TarnReportingDefaults() {
 
 std::shared_ptr<TarnReportingSystemMonitor> TarnReportingSystemMonitor::initWithQueue(
     std::shared_ptr<platform::WorkQueue> queue) {
-  const auto monitor = std::make_shared<TarnReportingSystemMonitor>(FromInit(), std::move(queue));
+  auto monitor = std::make_shared<TarnReportingSystemMonitor>(FromInit(), std::move(queue));
   monitor->populateInitialValues();
   monitor->listenForFeatureStateChanges();
   return monitor;
@@ -225,7 +233,7 @@ plist::Dictionary TarnReportingSystemMonitor::features() const {
   return features_;
 }
 
-void TarnReportingSystemMonitor::clear() {
+void TarnReportingSystemMonitor::clear() const {
   const plist::Dictionary features = this->features();
   for (const auto& [name, description] : features) {
     if (const plist::ValueView token = description.dictionary().get(kNotifyToken); token.present()) {

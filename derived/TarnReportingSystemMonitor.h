@@ -44,7 +44,7 @@ class TarnReportingSystemMonitor : public std::enable_shared_from_this<TarnRepor
 
   // Reads the service's defaults: "device_name" (as text) when there is one, "disable_reporting" always, 0 when it is
   // not set.
-  static plist::Dictionary TarnReportingDefaults();
+  static plist::Dictionary TarnReportingDefaults();  // NOLINT(readability-identifier-naming): its given name
 
   // An instance of one's own, read and listening.
   static std::shared_ptr<TarnReportingSystemMonitor> initWithQueue(std::shared_ptr<platform::WorkQueue> queue);
@@ -66,7 +66,7 @@ class TarnReportingSystemMonitor : public std::enable_shared_from_this<TarnRepor
     return systemMonitorDictionary_;
   }
   // Cancels the registration of every feature.
-  void clear();
+  void clear() const;
 
  private:
   void listenForFeature(const plist::Key& name, const plist::Dictionary& description);

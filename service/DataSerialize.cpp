@@ -151,10 +151,11 @@ class XmlWriter {
     const year_month_day calendar{day};
     const hh_mm_ss time{moment - day};
     char text[40];
-    std::snprintf(text, sizeof text, "%04d-%02u-%02uT%02d:%02d:%02dZ", static_cast<int>(calendar.year()),
-                  static_cast<unsigned>(calendar.month()), static_cast<unsigned>(calendar.day()),
-                  static_cast<int>(time.hours().count()), static_cast<int>(time.minutes().count()),
-                  static_cast<int>(time.seconds().count()));
+    static_cast<void>(std::snprintf(text, sizeof text, "%04d-%02u-%02uT%02d:%02d:%02dZ",
+                                    static_cast<int>(calendar.year()), static_cast<unsigned>(calendar.month()),
+                                    static_cast<unsigned>(calendar.day()), static_cast<int>(time.hours().count()),
+                                    static_cast<int>(time.minutes().count()),
+                                    static_cast<int>(time.seconds().count())));
     return element("date", text);
   }
 

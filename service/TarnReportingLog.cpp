@@ -69,7 +69,8 @@ void appendArgument(std::string& out, char conversion, const LogArgument& argume
 // a width in bits, then the letter of the conversion.
 std::size_t conversionLength(std::string_view text) {
   const std::size_t letter = std::min(text.find_first_not_of("hljtqz"), text.size());
-  const bool isConversion = letter < text.size() && std::string_view("@sidufx").find(text[letter]) != text.npos;
+  const bool isConversion =
+      letter < text.size() && std::string_view("@sidufx").find(text[letter]) != std::string_view::npos;
   return isConversion ? letter + 1 : 0;
 }
 
@@ -99,6 +100,7 @@ void appendFormatted(std::string& out, std::string_view format, std::initializer
 
 namespace detail {
 
+// NOLINTNEXTLINE(cppcoreguidelines-avoid-non-const-global-variables): one for the process, that is its point
 constinit const platform::Log* installedLog = nullptr;
 
 void logWrite(const platform::LogCategory& category, LogLevel level, std::string_view module, const LogText& text,
@@ -115,63 +117,63 @@ void logWrite(const platform::LogCategory& category, LogLevel level, std::string
 }  // namespace detail
 
 const platform::LogCategory& TarnReportingClientCategory() {
-  static constexpr platform::LogCategory category{kSubsystem, "tarnrc"};
-  return category;
+  static constexpr platform::LogCategory kCategory{kSubsystem, "tarnrc"};
+  return kCategory;
 }
 
 const platform::LogCategory& TarnReportingServiceDelegateCategory() {
-  static constexpr platform::LogCategory category{kSubsystem, "tarnrs"};
-  return category;
+  static constexpr platform::LogCategory kCategory{kSubsystem, "tarnrs"};
+  return kCategory;
 }
 
 const platform::LogCategory& TarnReportingSessionCategory() {
-  static constexpr platform::LogCategory category{kSubsystem, "tarnrr"};
-  return category;
+  static constexpr platform::LogCategory kCategory{kSubsystem, "tarnrr"};
+  return kCategory;
 }
 
 const platform::LogCategory& TarnReportingSessionRTCReportingCategory() {
-  static constexpr platform::LogCategory category{kSubsystem, "tarnri"};
-  return category;
+  static constexpr platform::LogCategory kCategory{kSubsystem, "tarnri"};
+  return kCategory;
 }
 
 const platform::LogCategory& TarnReportingDriverUtilityCategory() {
-  static constexpr platform::LogCategory category{kSubsystem, "tarnrd"};
-  return category;
+  static constexpr platform::LogCategory kCategory{kSubsystem, "tarnrd"};
+  return kCategory;
 }
 
 const platform::LogCategory& TarnReportingTraceCategory() {
-  static constexpr platform::LogCategory category{kSubsystem, "tarnrt"};
-  return category;
+  static constexpr platform::LogCategory kCategory{kSubsystem, "tarnrt"};
+  return kCategory;
 }
 
 const platform::LogCategory& TarnReportingWattlogCategory() {
-  static constexpr platform::LogCategory category{kSubsystem, "tarnrp"};
-  return category;
+  static constexpr platform::LogCategory kCategory{kSubsystem, "tarnrp"};
+  return kCategory;
 }
 
 const platform::LogCategory& TarnReportingPylonLogCategory() {
-  static constexpr platform::LogCategory category{kSubsystem, "tarnra"};
-  return category;
+  static constexpr platform::LogCategory kCategory{kSubsystem, "tarnra"};
+  return kCategory;
 }
 
 const platform::LogCategory& TarnReportingSnareLogCategory() {
-  static constexpr platform::LogCategory category{kSubsystem, "tarnrb"};
-  return category;
+  static constexpr platform::LogCategory kCategory{kSubsystem, "tarnrb"};
+  return kCategory;
 }
 
 const platform::LogCategory& TarnReportingSummaryLogCategory() {
-  static constexpr platform::LogCategory category{kSubsystem, "tarnru"};
-  return category;
+  static constexpr platform::LogCategory kCategory{kSubsystem, "tarnru"};
+  return kCategory;
 }
 
 const platform::LogCategory& TarnReportingDPLogCategory() {
-  static constexpr platform::LogCategory category{kSubsystem, "tarnrl"};
-  return category;
+  static constexpr platform::LogCategory kCategory{kSubsystem, "tarnrl"};
+  return kCategory;
 }
 
 const platform::LogCategory& TarnReportingAudioRegistrationCategory() {
-  static constexpr platform::LogCategory category{kSubsystem, "tarnrz"};
-  return category;
+  static constexpr platform::LogCategory kCategory{kSubsystem, "tarnrz"};
+  return kCategory;
 }
 
 }  // namespace tarn

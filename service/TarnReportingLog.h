@@ -43,6 +43,7 @@ using LogArgument = plist::ValueView;
 namespace detail {
 
 // The installed log, kept here so that the test of the level is one load and one branch.
+// NOLINTNEXTLINE(cppcoreguidelines-avoid-non-const-global-variables)
 extern const platform::Log* installedLog;
 
 inline bool logEnabled(LogLevel level) noexcept {

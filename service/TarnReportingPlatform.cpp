@@ -13,6 +13,7 @@ namespace tarn {
 namespace {
 
 // Not atomic: it changes only while no other thread uses the system.
+// NOLINTNEXTLINE(cppcoreguidelines-avoid-non-const-global-variables): one for the process, that is its point
 constinit std::unique_ptr<detail::Installation> standing;
 
 }  // namespace
@@ -34,7 +35,7 @@ namespace detail {
 
 Installation& currentInstallation() noexcept {
   if (standing == nullptr) {
-    std::fputs("tarnkit: the platform's facilities are not installed\n", stderr);
+    static_cast<void>(std::fputs("tarnkit: the platform's facilities are not installed\n", stderr));
     std::abort();
   }
   return *standing;

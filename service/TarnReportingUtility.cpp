@@ -51,21 +51,21 @@ std::string plainDecimal(double value) {
 
 // Adds one to the last digit of a decimal number, carrying as far as it goes.
 void incrementLastDigit(std::string& digits) {
-  for (auto digit = digits.rbegin(); digit != digits.rend(); ++digit) {
-    if (*digit == '.') {
+  for (std::size_t at = digits.size(); at-- > 0;) {
+    if (digits[at] == '.') {
       continue;
     }
-    if (*digit != '9') {
-      ++*digit;
+    if (digits[at] != '9') {
+      ++digits[at];
       return;
     }
-    *digit = '0';
+    digits[at] = '0';
   }
   digits.insert(digits.begin(), '1');
 }
 
-// Cuts a decimal number to `places` decimals, at least one, as number formatters do: on its decimal digits, halves
-// going to the even neighbour.
+// Cuts a decimal number to `places` decimals as number formatters do: on its decimal digits, halves going to the even
+// neighbour.
 void roundDecimals(std::string& digits, std::size_t places) {
   const std::size_t point = digits.find('.');
   const std::size_t keep = places == 0 ? point : point + 1 + places;
@@ -142,14 +142,14 @@ std::string TarnReportingUtilityRetrieveAppName(const plist::Dictionary& message
 }
 
 plist::Dictionary TarnReportingUtilityAddDates(const plist::Dictionary& message) {
-  static const plist::Key timestampKey("tarnreporting_timestamp");
-  static const plist::Key systemUptimeKey("systemuptime_sec");
-  static const plist::Key processUptimeKey("processuptime_ms");
+  static const plist::Key kTimestampKey("tarnreporting_timestamp");
+  static const plist::Key kSystemUptimeKey("systemuptime_sec");
+  static const plist::Key kProcessUptimeKey("processuptime_ms");
   const platform::Clock& clock = TarnReportingFacilities().clock;
   plist::Dictionary stamped = message;
-  stamped.set(timestampKey, clock.epochSeconds());
-  stamped.set(systemUptimeKey, roundedToInt32(clock.systemUptimeSeconds()));
-  stamped.set(processUptimeKey, processorMilliseconds(clock.processorTicks()));
+  stamped.set(kTimestampKey, clock.epochSeconds());
+  stamped.set(kSystemUptimeKey, roundedToInt32(clock.systemUptimeSeconds()));
+  stamped.set(kProcessUptimeKey, processorMilliseconds(clock.processorTicks()));
   return stamped;
 }
 

@@ -66,7 +66,7 @@ bool hasDomain(AudioEventCategory category) {
 // The parsers' tables leave out what the printers know on purpose: "Tessels" and "MemoryLog" were never taught to them,
 // and what clients rely on stays as it is.
 const std::unordered_map<std::string_view, AudioEventCategory>& categoriesByName() {
-  static const auto table = [] {
+  static const auto kTable = [] {
     std::unordered_map<std::string_view, AudioEventCategory> categories;
     for (std::size_t value = 1; value <= static_cast<std::size_t>(AudioEventCategory::HearingHealth); ++value) {
       categories.emplace(kCategoryNames[value], static_cast<AudioEventCategory>(value));
@@ -74,11 +74,11 @@ const std::unordered_map<std::string_view, AudioEventCategory>& categoriesByName
     categories.emplace("Unknown", AudioEventCategory::Unknown);
     return categories;
   }();
-  return table;
+  return kTable;
 }
 
 const std::unordered_map<std::string_view, AudioEventType>& typesByName() {
-  static const auto table = [] {
+  static const auto kTable = [] {
     std::unordered_map<std::string_view, AudioEventType> types;
     for (std::size_t value = 0; value < static_cast<std::size_t>(AudioEventType::MemoryLog); ++value) {
       types.emplace(kTypeNames[value], static_cast<AudioEventType>(value));
@@ -86,7 +86,7 @@ const std::unordered_map<std::string_view, AudioEventType>& typesByName() {
     types.emplace("Unknown", AudioEventType::Unknown);
     return types;
   }();
-  return table;
+  return kTable;
 }
 
 }  // namespace

@@ -82,7 +82,7 @@ class ManualSchedule {
     std::size_t pieces = 0;
     while (runOne(filter)) {
       if (++pieces > ManualWorkQueues::kMostPiecesInOneRun) {
-        std::fputs("ManualWorkQueues: the queues never become idle\n", stderr);
+        static_cast<void>(std::fputs("ManualWorkQueues: the queues never become idle\n", stderr));
         std::abort();
       }
     }
