@@ -25,9 +25,10 @@ constexpr const char* kRinger = "ringerstate";
 constexpr const char* kRingerChanged = "sys.oxbow.homeshell.ringerstate";
 
 class TarnReportingSystemMonitorTest : public ::testing::Test {
- protected:
+ public:
   ~TarnReportingSystemMonitorTest() override { TarnReportingSystemMonitor::reset(); }
 
+ protected:
   void start() { TarnReportingSystemMonitor::initializeWithQueue(TarnReportingUtilityGetReportingServerQueue()); }
   plist::Dictionary state(const char* feature) {
     return TarnReportingSystemMonitor::getSystemMonitorDictionary()->state(feature);

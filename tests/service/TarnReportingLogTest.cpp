@@ -14,7 +14,7 @@ namespace {
 class TarnReportingLogTest : public ::testing::Test {
  protected:
   // The one line that was logged, without its prefix.
-  std::string message() {
+  std::string message() const {
     const auto messages = platform_.log.messages();
     EXPECT_EQ(messages.size(), 1U);
     return messages.empty() ? std::string() : messages.front();

@@ -138,7 +138,7 @@ TEST_F(TarnReportingUtilityTest, ProcessorTimeBeyondThirtyTwoBitsIsHeldToThem) {
 }
 
 TEST_F(TarnReportingUtilityTest, ServerQueueIsMadeOnceWithItsNameAndTheHighestQuality) {
-  const auto queue = TarnReportingUtilityGetReportingServerQueue();
+  const auto& queue = TarnReportingUtilityGetReportingServerQueue();
   EXPECT_EQ(TarnReportingUtilityGetReportingServerQueue(), queue);
   EXPECT_EQ(platform_.workQueues.names(), std::vector<std::string>{"sys.oxbow.tarnkit.reporting.server"});
   const auto made = platform_.workQueues.find("sys.oxbow.tarnkit.reporting.server");

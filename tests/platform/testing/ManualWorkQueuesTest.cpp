@@ -99,9 +99,9 @@ TEST_F(ManualWorkQueuesTest, NestedRunLeavesTheBusyQueueAlone) {
   const auto backEnd = queue("back-end");
   server->async([&] {
     server->async(note("server behind"));
-    backEnd->async([&] { ran_.push_back(server->isCurrent() ? "wrong" : "back-end"); });
+    backEnd->async([&] { ran_.emplace_back(server->isCurrent() ? "wrong" : "back-end"); });
     EXPECT_EQ(queues_.runUntilIdle(), 1U);
-    ran_.push_back(server->isCurrent() ? "server done" : "wrong");
+    ran_.emplace_back(server->isCurrent() ? "server done" : "wrong");
   });
   queues_.runUntilIdle();
   EXPECT_EQ(ran_, (std::vector<std::string>{"back-end", "server done", "server behind"}));

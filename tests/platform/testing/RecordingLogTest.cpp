@@ -38,6 +38,7 @@ TEST(RecordingLog, CountsAndFindsParts) {
 TEST(RecordingLog, TakesEntriesFromManyThreads) {
   RecordingLog log;
   std::vector<std::thread> threads;
+  threads.reserve(4);
   for (int thread = 0; thread < 4; ++thread) {
     threads.emplace_back([&log] {
       for (int entry = 0; entry < 500; ++entry) {
