@@ -32,8 +32,14 @@ endif()
 if(TARN_SANITIZE)
   target_compile_options(tarn_options INTERFACE -fsanitize=${TARN_SANITIZE} -fno-sanitize-recover=all)
   target_link_options(tarn_options INTERFACE -fsanitize=${TARN_SANITIZE})
-  # The sanitizers' own instrumentation upsets the flow analysis behind this one.
-  target_compile_options(tarn_options INTERFACE -Wno-maybe-uninitialized)
+  if(CMAKE_CXX_COMPILER_ID STREQUAL "GNU")
+    # The sanitizers' own instrumentation upsets the flow analysis behind this one.
+    target_compile_options(tarn_options INTERFACE -Wno-maybe-uninitialized)
+  endif()
+endif()
+if(TARN_FUZZ)
+  # The fuzzers steer by which branches of all the code are reached.
+  target_compile_options(tarn_options INTERFACE -fsanitize=fuzzer-no-link)
 endif()
 if(TARN_COVERAGE)
   target_compile_options(tarn_options INTERFACE --coverage -fprofile-update=atomic)
@@ -71,4 +77,11 @@ function(tarn_test name)
   set_target_properties(${name} PROPERTIES RUNTIME_OUTPUT_DIRECTORY "${PROJECT_BINARY_DIR}/tests")
   target_link_libraries(${name} PRIVATE tarn_options ${arg_DEPENDS} GTest::gtest GTest::gtest_main)
   gtest_discover_tests(${name} DISCOVERY_MODE PRE_TEST DISCOVERY_TIMEOUT 60 PROPERTIES TIMEOUT ${arg_TIMEOUT})
+endfunction()
+
+# tarn_fuzzer(NAME SOURCES file... [DEPENDS target...]): a libFuzzer program; its seeds lie in fuzz/corpus/NAME.
+function(tarn_fuzzer name)
+  cmake_parse_arguments(PARSE_ARGV 1 arg "" "" "SOURCES;DEPENDS")
+  tarn_program(${name} SOURCES ${arg_SOURCES} DEPENDS ${arg_DEPENDS})
+  target_link_options(${name} PRIVATE -fsanitize=fuzzer)
 endfunction()

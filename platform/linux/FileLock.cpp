@@ -1,13 +1,19 @@
 #include "platform/linux/FileLock.h"
 
 #include <fcntl.h>
+#include <poll.h>
 #include <sys/file.h>
 
 #include <cerrno>
-#include <ctime>
 #include <utility>
 
 namespace tarn::linux_host {
+
+namespace {
+
+constexpr int kNapMilliseconds = 1;
+
+}  // namespace
 
 int FileLock::take(int descriptor, std::chrono::milliseconds patience) {
   // The kernel has no bounded wait for such a lock. Holders keep it for a few writes, so a short nap finds it free.
@@ -19,8 +25,7 @@ int FileLock::take(int descriptor, std::chrono::milliseconds patience) {
     if (std::chrono::steady_clock::now() >= deadline) {
       return ETIMEDOUT;
     }
-    const timespec nap{0, 1'000'000};
-    ::nanosleep(&nap, nullptr);
+    ::poll(nullptr, 0, kNapMilliseconds);
   }
   return 0;
 }

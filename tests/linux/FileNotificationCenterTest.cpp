@@ -9,16 +9,20 @@
 #include <cerrno>
 #include <filesystem>
 #include <fstream>
+#include <future>
+#include <thread>
 #include <vector>
 
 #include "platform/testing/ManualClock.h"
 #include "platform/testing/ManualWorkQueues.h"
 #include "platform/testing/RecordingLog.h"
+#include "tests/linux/Eventually.h"
 #include "tests/linux/TemporaryFolder.h"
 
 namespace tarn::linux_host {
 namespace {
 
+using testing::eventually;
 using platform::NotificationCenter;
 
 constexpr const char* kName = "sys.oxbow.ringer";
@@ -235,16 +239,14 @@ class HeldQueue final : public platform::WorkQueue {
  public:
   void async(platform::Work) override {
     entered = true;
-    while (held) {
-      std::this_thread::sleep_for(std::chrono::milliseconds(1));
-    }
+    letGo.get_future().wait();
   }
   void asyncAfter(std::chrono::nanoseconds, platform::Work) override {}
   bool isCurrent() const noexcept override { return false; }
   std::size_t waiting() const noexcept override { return 0; }
 
   std::atomic<bool> entered{false};
-  std::atomic<bool> held{true};
+  std::promise<void> letGo;
 };
 
 TEST_F(FileNotifications, LostCountOfChangesCallsEveryRegistration) {
@@ -264,7 +266,7 @@ TEST_F(FileNotifications, LostCountOfChangesCallsEveryRegistration) {
     one << 'x' << std::flush;
     two << 'x' << std::flush;
   }
-  held->held = false;
+  held->letGo.set_value();
   EXPECT_TRUE(eventuallyRun(calls, 1));
 }
 

@@ -122,6 +122,13 @@ TEST(HostConfiguration, SyntaxErrorNamesItsLine) {
   EXPECT_EQ(errorOf("[tally]\n[tally]\n").substr(0, 9), "c.toml:2:");
 }
 
+TEST(HostConfiguration, LettersOutsideAsciiAreReadInTextsAndRefusedAsKeys) {
+  const ReadConfiguration read = parseConfiguration("[paths]\nflume = \"\"\"\\\n \xd1\x90\xc3\xa9\"\"\"\n", "c.toml");
+  ASSERT_TRUE(read.configuration) << read.error;
+  EXPECT_EQ(read.configuration->paths.flume, "\xd1\x90\xc3\xa9");
+  EXPECT_EQ(errorOf("[paths]\n\xd1\x90 = 1\n").substr(0, 10), "c.toml:2: ");
+}
+
 TEST(HostConfiguration, ErrorsAreOneLine) {
   EXPECT_EQ(errorOf("[\"a\\nb\"]\n"), "c.toml:1: unknown section [a\\nb]");
 }

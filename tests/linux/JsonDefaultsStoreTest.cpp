@@ -8,6 +8,7 @@
 #include <unistd.h>
 
 #include <atomic>
+#include <chrono>
 #include <cmath>
 #include <filesystem>
 #include <limits>
@@ -16,10 +17,13 @@
 
 #include "platform/linux/UniqueDescriptor.h"
 #include "platform/testing/RecordingLog.h"
+#include "tests/linux/Eventually.h"
 #include "tests/linux/TemporaryFolder.h"
 
 namespace tarn::linux_host {
 namespace {
+
+using testing::eventually;
 
 constexpr const char* kSuite = "sys.oxbow.tarnkit";
 constexpr const char* kFile = "defaults/sys.oxbow.tarnkit.json";
@@ -83,7 +87,8 @@ TEST_F(JsonDefaults, ChangeByAnotherIsSeenByTheNextRead) {
 
 TEST_F(JsonDefaults, ChangeOfAFileThatWasReadLongAgoIsSeen) {
   folder_.write(kFile, "{\"n\": 1}");
-  std::this_thread::sleep_for(std::chrono::milliseconds(150));
+  const auto later = std::chrono::steady_clock::now() + std::chrono::milliseconds(150);
+  ASSERT_TRUE(eventually([&] { return std::chrono::steady_clock::now() > later; }));
   EXPECT_EQ(store_.value(kSuite, "n"), plist::Value(1));
   EXPECT_EQ(store_.value(kSuite, "n"), plist::Value(1));
   folder_.write(kFile, "{\"n\": 2}");

@@ -8,11 +8,13 @@
 #include <filesystem>
 
 #include "platform/linux/LinuxClock.h"
+#include "tests/linux/Eventually.h"
 #include "tests/linux/TemporaryFolder.h"
 
 namespace tarn::linux_host {
 namespace {
 
+using testing::eventually;
 using platform::ThermalState;
 
 class RecordedFacts : public ::testing::Test {

@@ -15,11 +15,13 @@
 #include "platform/linux/LogTarget.h"
 #include "platform/linux/UniqueDescriptor.h"
 #include "platform/testing/ManualClock.h"
+#include "tests/linux/Eventually.h"
 #include "tests/linux/TemporaryFolder.h"
 
 namespace tarn::linux_host {
 namespace {
 
+using testing::eventually;
 using platform::LogLevel;
 
 constexpr platform::LogCategory kCategory{"sys.oxbow.tarnkit", "tarnss"};

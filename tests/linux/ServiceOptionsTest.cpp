@@ -12,7 +12,7 @@
 namespace tarn::linux_host {
 namespace {
 
-const HostEnvironment kUser{false, "/run/user/7", "/home/u/state", "/home/u"};
+const HostEnvironment kUser{false, "/run/user/7", "/srv/u/state", "/srv/u"};
 
 ServiceCommand parse(std::vector<const char*> arguments, const HostEnvironment& environment = kUser) {
   arguments.insert(arguments.begin(), "tarnreportingd");
@@ -32,7 +32,7 @@ TEST(ServiceOptions, DefaultsFollowTheUsersFolders) {
   const ServiceCommand command = parse({});
   ASSERT_TRUE(command.options);
   EXPECT_EQ(command.options->socketPath, "/run/user/7/tarnreporting.sock");
-  EXPECT_EQ(command.options->stateDirectory, "/home/u/state/tarnreporting");
+  EXPECT_EQ(command.options->stateDirectory, "/srv/u/state/tarnreporting");
   EXPECT_FALSE(command.options->configurationFile);
   EXPECT_FALSE(command.options->devicePropertiesFile);
   EXPECT_EQ(command.options->logLevel, platform::LogLevel::Default);
@@ -40,17 +40,17 @@ TEST(ServiceOptions, DefaultsFollowTheUsersFolders) {
 }
 
 TEST(ServiceOptions, DefaultsOfRootAreTheSystemsWhateverItsEnvironment) {
-  const ServiceCommand command = parse({}, {true, "/run/user/0", "/root/state", "/root"});
+  const ServiceCommand command = parse({}, {true, "/run/user/0", "/srv/root/state", "/srv/root"});
   ASSERT_TRUE(command.options);
   EXPECT_EQ(command.options->socketPath, "/run/tarnreporting/socket");
   EXPECT_EQ(command.options->stateDirectory, "/var/lib/tarnreporting");
 }
 
 TEST(ServiceOptions, UnsetAndRelativeVariablesDoNotCount) {
-  const ServiceCommand command = parse({}, {false, "run", "state", "/home/u"});
+  const ServiceCommand command = parse({}, {false, "run", "state", "/srv/u"});
   ASSERT_TRUE(command.options);
   EXPECT_FALSE(command.options->socketPath);
-  EXPECT_EQ(command.options->stateDirectory, "/home/u/.local/state/tarnreporting");
+  EXPECT_EQ(command.options->stateDirectory, "/srv/u/.local/state/tarnreporting");
   EXPECT_EQ(complaintOf({}, {false, "", "", ""}),
             "tarnreportingd: --state-dir: must be given, neither XDG_STATE_HOME nor HOME names a folder\n");
 }

@@ -3,13 +3,11 @@
 
 #include <unistd.h>
 
-#include <chrono>
 #include <filesystem>
 #include <fstream>
 #include <sstream>
 #include <string>
 #include <string_view>
-#include <thread>
 
 namespace tarn::linux_host {
 
@@ -43,18 +41,5 @@ class TemporaryFolder {
  private:
   std::string path_;
 };
-
-// Asks until `condition` holds, for at most ten seconds; whether it does.
-template <class Condition>
-bool eventually(Condition condition) {
-  const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(10);
-  while (!condition()) {
-    if (std::chrono::steady_clock::now() > deadline) {
-      return false;
-    }
-    std::this_thread::sleep_for(std::chrono::milliseconds(1));
-  }
-  return true;
-}
 
 }  // namespace tarn::linux_host
