@@ -3,7 +3,7 @@
 #include <sqlite3.h>
 
 #include <cerrno>
-#include <cstring>
+#include <system_error>
 #include <utility>
 
 #include "platform/recorder/Statement.h"
@@ -59,7 +59,7 @@ std::string Connection::errorText() const {
   const int systemError = sqlite3_system_errno(database_);
   const int kind = sqlite3_errcode(database_) & 0xFF;
   if (systemError != 0 && (kind == SQLITE_IOERR || kind == SQLITE_CANTOPEN || kind == SQLITE_FULL)) {
-    text.append(" (").append(std::strerror(systemError)).append(")");
+    text.append(" (").append(std::generic_category().message(systemError)).append(")");
   }
   return text;
 }

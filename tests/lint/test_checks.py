@@ -174,7 +174,7 @@ class BannedCalls(unittest.TestCase):
         text = "std::this_thread::sleep_for(delay);\n"
         for path in ("tests/e2e/RunTest.cpp", "tests/wire/QueueStressTest.cpp"):
             self.assertEqual(found(banned_calls, {path: text}), [])
-        for path in ("tests/session/SessionTest.cpp", "platform/linux/Loop.cpp"):
+        for path in ("tests/session/SessionTest.cpp", "platform/linux/Loop.cpp", "wire/Encoder.cpp"):
             self.assertEqual(found(banned_calls, {path: text}), [(path, 1)])
 
     def test_adapters_may_ask_the_clock(self):
@@ -213,6 +213,10 @@ class Wording(unittest.TestCase):
         for folder in wording.PRIVATE_ROOTS:
             with self.subTest(folder):
                 self.assertEqual(found(wording, {"docs/a.md": f"see\n `/{folder}/anna/tarnkit`\n"}), [("docs/a.md", 2)])
+
+    def test_tests_may_make_up_users_but_name_no_other_private_path(self):
+        self.assertEqual(found(wording, {"tests/linux/A.cpp": '"/home/u/x"\n"/' + "mnt" + '/u/x"\n'}),
+                         [("tests/linux/A.cpp", 2)])
 
     def test_paths_of_any_machine_and_relative_ones_are_fine(self):
         text = "/var/lib/tarnreporting /run/tarnreporting /usr/share\n./work/a x/home/b $XDG_STATE_HOME/data/x\n"
