@@ -137,7 +137,8 @@ class BannedCalls(unittest.TestCase):
         "int r = rand();", "int r = std::rand();", "std::random_device device;", "text = strerror(errno);",
         "out << std::endl;", 'std::cout << "x";', 'printf("x");', 'std::fprintf(file, "x");',
         'sprintf(text, "x");', "strcpy(a, b);", "int n = atoi(text);", "auto n = std::strtol(text, nullptr, 10);",
-        "auto* p = new Session();", "return new Session();", "delete p;", "delete[] p;", "auto p = malloc(5);",
+        "auto* p = new Session();", "auto* p = ::new Session();",
+        "return new Session();", "delete p;", "delete[] p;", "auto p = malloc(5);",
         "std::thread worker(run);", "auto f = std::async(run);", "exit(1);", "::_exit(1);", 'system("ls");',
         "GTEST_SKIP();", "TEST(A, DISABLED_b) {}", "friend class SessionTest;", "FRIEND_TEST(Session, stops);",
         "using namespace std;",
@@ -145,7 +146,8 @@ class BannedCalls(unittest.TestCase):
     FINE = (
         "double time() const;", "void exit(int status);", "clock.time();", "facilities.clock->time(now);",
         "Session(const Session&) = delete;", "void operator delete(void* p);", "#include <new>\n",
-        "queue.sleep(5);", "renew(5);", "int brand(int a);", "platform::exit(1);", "auto n = newest;",
+        "queue.sleep(5);", "renew(5);",
+        "auto* p = ::new (memory) Shared;", "int brand(int a);", "platform::exit(1);", "auto n = newest;",
         '// printf("x")\n', 'auto s = "getenv(";', "std::thread::id id;", "std::time_t t;", "Outcome open(Path path);",
         "using namespace std::chrono_literals;", "friend class Iterator;", "runtime(nullptr);", "a.free(b);",
     )

@@ -63,7 +63,7 @@ BANS = (
     Ban(call("sprintf|vsprintf|asprintf|vasprintf"), NOWHERE, "std::to_chars and append, or std::snprintf"),
     Ban(call("strcpy|strcat|strncpy|strtok|gets"), NOWHERE, "std::string, std::string_view"),
     Ban(call("atoi|atol|atoll|atof|strtol|strtoll|strtoul|strtoull|strtod|strtof|sscanf"), NOWHERE, "std::from_chars"),
-    Ban(r"(?<!operator)(?<!operator )\bnew\b(?!\s*>)", ("plist/*", "platform/UniqueFunction.h"),
+    Ban(r"(?<!operator)(?<!operator )(?<!::)\bnew\b(?!\s*>)|::new\b(?!\s*\()", ("plist/*", "platform/UniqueFunction.h"),
         "std::make_unique or std::make_shared"),
     Ban(r"(?<!operator)(?<!operator )(?<!=)(?<!= )\bdelete\b", ("plist/*", "platform/UniqueFunction.h"),
         "a type that owns"),

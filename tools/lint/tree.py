@@ -12,6 +12,8 @@ from dataclasses import dataclass
 CXX = (".cpp", ".h")
 SCRIPTS = (".py", ".sh")
 TEXTS = CXX + SCRIPTS + (".md", ".txt", ".cmake", ".toml", ".json", ".jsonl", ".service", ".socket", ".conf", ".in")
+# Seeds of the fuzzers are meant to be wrong.
+RAW = ("fuzz/corpus/",)
 NAMES = ("dev", "run", ".clang-tidy", ".clang-format", ".gitignore")
 
 
@@ -35,6 +37,8 @@ class Tree:
     def at(root):
         files = {}
         for path in listed(root):
+            if path.startswith(RAW):
+                continue
             if path.endswith(TEXTS) or os.path.basename(path) in NAMES:
                 with open(os.path.join(root, path), encoding="utf-8", errors="surrogateescape", newline="") as file:
                     files[path] = file.read()
