@@ -126,9 +126,10 @@ void Player::start(Connection& connection, std::int64_t id, std::size_t line) {
     reply(line, true);
     return;
   }
-  if (!session->started()) {
-    session->heldStartLine = line;
+  if (session->started()) {
+    return;  // never answered
   }
+  session->heldStartLine = line;
   session->start();
 }
 
