@@ -1,0 +1,135 @@
+#include "tests/e2e/ServiceFixture.h"
+
+#include <signal.h>
+
+#include "platform/recorder/EventReader.h"
+#include "plist/Json.h"
+
+namespace tarn::e2e {
+
+ServiceFixture::~ServiceFixture() {
+  if (HasFailure() && service_) {
+    std::cerr << "the service logged:\n" << serviceLog();
+  }
+}
+
+Process::Setup ServiceFixture::serviceSetup(const std::vector<std::string>& options) const {
+  Process::Setup setup;
+  setup.words = {TARNREPORTINGD, "--state-dir", state()};
+  setup.words.insert(setup.words.end(), options.begin(), options.end());
+  return setup;
+}
+
+bool ServiceFixture::startService(const std::vector<std::string>& options) {
+  std::vector<std::string> all = {"--socket", socket()};
+  all.insert(all.end(), options.begin(), options.end());
+  service_ = std::make_unique<Process>(serviceSetup(all), directory_);
+  const auto accepts = [this] {
+    return client::TarnReportingClient::connect(socket()).client != nullptr || !service_->isRunning();
+  };
+  return eventually(accepts) && service_->isRunning();
+}
+
+Finished ServiceFixture::runService(const std::vector<std::string>& options) {
+  return runToEnd(serviceSetup(options), directory_);
+}
+
+int ServiceFixture::stopService(int signal) {
+  service_->signal(signal);
+  return service_->wait().value_or(-1);
+}
+
+bool ServiceFixture::logSays(const std::string& text) const {
+  return serviceLog().find(text) != std::string::npos;
+}
+
+std::unique_ptr<Process> ServiceFixture::startCtl(const std::vector<std::string>& words, const std::string& input,
+                                                  int outputFd) {
+  Process::Setup setup;
+  setup.words = {TARNREPORTINGCTL, "--socket", socket(), "--state-dir", state()};
+  setup.words.insert(setup.words.end(), words.begin(), words.end());
+  setup.input = input;
+  setup.outputFd = outputFd;
+  return std::make_unique<Process>(setup, directory_);
+}
+
+Finished ServiceFixture::ctl(const std::vector<std::string>& words, const std::string& input) {
+  const auto process = startCtl(words, input);
+  const auto status = process->wait();
+  return {status.value_or(-1), process->output(), process->complaints()};
+}
+
+std::vector<json> ServiceFixture::play(const std::string& script) {
+  const Finished played = ctl({"run"}, script);
+  EXPECT_EQ(played.status, 0) << played.complaints;
+  return jsonLines(played.output);
+}
+
+std::unique_ptr<client::TarnReportingClient> ServiceFixture::connect() {
+  auto connected = client::TarnReportingClient::connect(socket());
+  EXPECT_TRUE(connected.client) << connected.error;
+  return std::move(connected.client);
+}
+
+std::vector<Event> ServiceFixture::events(const std::string& nameGlob) {
+  std::vector<Event> found;
+  recorder::EventReader reader(state() + "/recorder.sqlite3");
+  recorder::EventQuery query;
+  query.nameGlob = nameGlob;
+  recorder::EventReader::Result result;
+  do {
+    result = reader.read(query);
+    EXPECT_NE(result.status, recorder::EventReader::Status::Failed) << result.error;
+    for (const auto& row : result.rows) {
+      found.push_back({row.id, row.backend, row.name, json::parse(row.payload), json::parse(row.detail)});
+    }
+    query.after = result.lookedUpTo;
+  } while (result.more);
+  return found;
+}
+
+std::vector<Event> ServiceFixture::eventsOnceThereAre(std::size_t count, const std::string& nameGlob) {
+  std::vector<Event> found;
+  eventually([&] {
+    found = events(nameGlob);
+    return found.size() >= count;
+  });
+  return found;
+}
+
+std::vector<std::string> ServiceFixture::names(const std::vector<Event>& events) const {
+  std::vector<std::string> all;
+  for (const Event& event : events) {
+    all.push_back(event.name);
+  }
+  return all;
+}
+
+json ServiceFixture::status() {
+  const auto client = connect();
+  const client::Reply reply = client->status();
+  EXPECT_TRUE(reply.ok()) << reply.error.text;
+  std::string text;
+  plist::appendJson(text, reply.dictionary());
+  return json::parse(text);
+}
+
+json ServiceFixture::ledgerAtRest() {
+  json ledger;
+  EXPECT_TRUE(eventually([&] {
+    ledger = status();
+    return ledger.at("queued") == 0 && ledger.at("recorder_waiting") == 0;
+  })) << ledger.dump();
+  return ledger;
+}
+
+json replyTo(const std::vector<json>& replies, std::size_t line) {
+  for (const json& reply : replies) {
+    if (reply.at("line") == line) {
+      return reply;
+    }
+  }
+  return {};
+}
+
+}  // namespace tarn::e2e

@@ -1,0 +1,100 @@
+// Settings: the defaults store, the notifications and the device properties, as a running service sees them.
+#include <signal.h>
+
+#include "tests/e2e/ServiceFixture.h"
+
+namespace tarn::e2e {
+namespace {
+
+class Settings : public ServiceFixture {
+ protected:
+  bool waitForLog(const std::string& text) {
+    return eventually([&] { return logSays(text); });
+  }
+};
+
+TEST_F(Settings, ReportingIsOffWhenTheDefaultsSaySo) {
+  ASSERT_EQ(ctl({"defaults", "write", "sys.oxbow.tarnkit", "disable_reporting", "true"}).status, 0);
+  ASSERT_TRUE(startService());
+  const auto replies = play(R"({"op":"createReportingSession","reporterID":1}
+{"op":"sendMessage","reporterIDs":[1],"category":1,"type":1,"message":{}}
+{"op":"reporterID","reporterID":1}
+)");
+  EXPECT_TRUE(replyTo(replies, 1).at("error").is_null());
+  const json error = replyTo(replies, 2).at("error");
+  EXPECT_EQ(error.at("domain"), "sys.oxbow.audio.reporting");
+  EXPECT_EQ(error.at("code"), 1);
+  EXPECT_TRUE(replyTo(replies, 2).at("result").is_null());
+}
+
+TEST_F(Settings, AChangeOfADefaultReachesTheRunningServiceWithItsNotification) {
+  ASSERT_TRUE(startService({"--log-level", "debug"}));
+  ASSERT_EQ(ctl({"defaults", "write", "sys.oxbow.tarnkit", "device_name", "\"kitchen\""}).status, 0);
+  ASSERT_EQ(ctl({"notify", "sys.oxbow.tarnkit.reporting"}).status, 0);
+  EXPECT_TRUE(waitForLog("Updating value featureName=device_name"));
+}
+
+TEST_F(Settings, AStateWordReachesTheRunningService) {
+  ASSERT_TRUE(startService({"--log-level", "debug"}));
+  ASSERT_EQ(ctl({"notify", "sys.oxbow.homeshell.ringerstate", "--state", "1"}).status, 0);
+  EXPECT_TRUE(waitForLog("Updating value featureName=ringerstate"));
+}
+
+TEST_F(Settings, ABrokenDefaultsFileIsLoggedReadAsEmptyAndLeftAlone) {
+  const std::string path = state() + "/defaults/sys.oxbow.tarnkit.json";
+  const std::string broken = "{\n  \"disable_reporting\": true,\n  oops\n";
+  writeFile(path, broken);
+  ASSERT_TRUE(startService());
+  EXPECT_TRUE(waitForLog(path + ":3:")) << serviceLog();
+  const auto replies = play(R"({"op":"createReportingSession","reporterID":1}
+{"op":"sendMessage","reporterIDs":[1],"category":1,"type":1,"message":{}}
+)");
+  EXPECT_TRUE(replyTo(replies, 2).at("error").is_null());
+  EXPECT_EQ(contentOf(path), broken);
+  EXPECT_EQ(ctl({"defaults", "read", "sys.oxbow.tarnkit"}).status, 65);
+  EXPECT_EQ(ctl({"defaults", "write", "sys.oxbow.tarnkit", "a", "1"}).status, 65);
+  EXPECT_EQ(contentOf(path), broken);
+}
+
+TEST_F(Settings, AnInternalBuildAnswersTheStartOfATestSessionAtOnce) {
+  writeFile(directory_ / "device.json", "{\"InternalBuild\": true}");
+  ASSERT_TRUE(startService({"--device-properties", directory_ / "device.json"}));
+  const auto replies = play(R"({"op":"createReportingSession","reporterID":1}
+{"op":"setServiceType","reporterID":1,"serviceType":"test"}
+{"op":"startReportingSessionForID","reporterID":1}
+{"op":"getAllReporters"}
+)");
+  EXPECT_EQ(replyTo(replies, 3).value("result", json()), true);
+}
+
+TEST_F(Settings, DefaultsAreReadWrittenAndDeleted) {
+  EXPECT_EQ(ctl({"defaults", "write", "org.example", "list", R"([1, 2.5, {"$date": 7}, {"$data": "CgsM"}])"}).status,
+            0);
+  const Finished read = ctl({"defaults", "read", "org.example", "list"});
+  EXPECT_EQ(read.status, 0);
+  EXPECT_EQ(json::parse(read.output), json::parse(R"([1, 2.5, {"$date": 7}, {"$data": "CgsM"}])"));
+  EXPECT_EQ(ctl({"defaults", "write", "org.example", "other", "-5"}).status, 0);
+  EXPECT_EQ(json::parse(ctl({"defaults", "read", "org.example"}).output).at("other"), -5);
+  EXPECT_EQ(ctl({"defaults", "delete", "org.example", "list"}).status, 0);
+  const Finished gone = ctl({"defaults", "read", "org.example", "list"});
+  EXPECT_EQ(gone.status, 1);
+  EXPECT_EQ(gone.output, "");
+  EXPECT_NE(gone.complaints.find("list"), std::string::npos);
+  EXPECT_EQ(ctl({"defaults", "write", "org.example", "bad", "{\"a\":1,\"a\":2}"}).status, 65);
+}
+
+TEST_F(Settings, NotifyKeepsTheStateWordUnlessOneIsGiven) {
+  const std::string path = state() + "/notifications/org.example.n";
+  const auto word = [&path] { return contentOf(path); };
+  EXPECT_EQ(ctl({"notify", "org.example.n"}).status, 0);
+  EXPECT_EQ(word(), std::string(8, '\0'));
+  EXPECT_EQ(ctl({"notify", "org.example.n", "--state", "258"}).status, 0);
+  EXPECT_EQ(word(), std::string("\x02\x01\0\0\0\0\0\0", 8));
+  EXPECT_EQ(ctl({"notify", "org.example.n"}).status, 0);
+  EXPECT_EQ(word(), std::string("\x02\x01\0\0\0\0\0\0", 8));
+  EXPECT_EQ(ctl({"notify", "org.example.n", "--state", "-1"}).status, 64);
+  EXPECT_EQ(ctl({"notify", "org.example.n", "--state", "x"}).status, 64);
+}
+
+}  // namespace
+}  // namespace tarn::e2e
