@@ -36,7 +36,8 @@ class CborReader {
   bool atBreak() const noexcept { return at_ != end_ && *at_ == kBreak; }
   void skip(std::size_t bytes) noexcept { at_ += bytes; }
 
-  // False when the bytes end inside the head, or its information is one of the reserved 28 to 30.
+  // False when the bytes end inside the head, or it is reserved: information 28 to 30, or an integer or a tag that
+  // leaves its argument open.
   bool readHead(CborHead& head) noexcept {
     if (at_ == end_) [[unlikely]] {
       return false;
@@ -74,10 +75,14 @@ class CborReader {
         return readBigEndian<8>(head.argument);
       case kInfoOpen:
         head.argument = 0;
-        return true;
+        return mayBeOpen(head.major);
       default:
         return false;
     }
+  }
+
+  static bool mayBeOpen(Major major) noexcept {
+    return major != Major::Unsigned && major != Major::Negative && major != Major::Tag;
   }
 
   template <std::size_t kBytes>

@@ -215,7 +215,7 @@ bool PropertyListReader<Sink>::readSimple(const CborHead& head, plist::ValueView
 
 template <class Sink>
 bool PropertyListReader<Sink>::readDate(const CborHead& head, plist::ValueView& value) {
-  if (head.argument != 1 || head.open()) {
+  if (head.argument != 1) {
     return fail("a tag other than that of a date");
   }
   CborHead number;

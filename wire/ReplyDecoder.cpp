@@ -43,7 +43,7 @@ bool ReplyPass::run() {
   CborHead head;
   CborHead id;
   if (!in_.readHead(head) || head.major != Major::Array || head.open() || head.argument < 2 || !in_.readHead(id) ||
-      id.major != Major::Unsigned || id.open()) {
+      id.major != Major::Unsigned) {
     return false;
   }
   reply_.id = id.argument;

@@ -87,7 +87,7 @@ bool RequestPass::countOpenItems() {
 bool RequestPass::readID() {
   trouble_ = "no readable id";
   CborHead head;
-  if (items_ < 1 || !in_.readHead(head) || head.major != Major::Unsigned || head.open()) {
+  if (items_ < 1 || !in_.readHead(head) || head.major != Major::Unsigned) {
     return false;
   }
   request_.id = head.argument;

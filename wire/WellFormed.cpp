@@ -40,14 +40,14 @@ class Skipper {
     }
     if (head.major == Major::Tag) {
       behindTag_ = true;  // the tagged item is the one that counts
-      return head.open() ? kReserved : nullptr;
+      return nullptr;
     }
     behindTag_ = false;
     countItem();
     switch (head.major) {
       case Major::Unsigned:
       case Major::Negative:
-        return head.open() ? kReserved : nullptr;
+        return nullptr;
       case Major::Bytes:
       case Major::Text:
         return head.open() ? takeChunks(head.major) : takeBytes(head.argument);

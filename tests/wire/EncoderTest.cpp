@@ -51,7 +51,7 @@ TEST(Encoder, FloatsKeepTheirWidth) {
 
 TEST(Encoder, DatesAreIntegersWhenTheyHaveNoFraction) {
   EXPECT_EQ(hexOf(plist::Date{1363896240.0}), "c11a514b67b0");
-  EXPECT_EQ(hexOf(plist::Date{1363896240.5}), "c1fb41d452d9e8200000");
+  EXPECT_EQ(hexOf(plist::Date{1363896240.5}), "c1fb41d452d9ec200000");
   EXPECT_EQ(hexOf(plist::Date{-1.0}), "c120");
   EXPECT_EQ(hexOf(plist::Date{-0.0}), "c1fb8000000000000000");
   EXPECT_EQ(hexOf(plist::Date{1e300}), "c1fb7e37e43c8800759c");

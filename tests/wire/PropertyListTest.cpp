@@ -78,7 +78,7 @@ TEST(PropertyList, HalfFloatsReadAs32Bit) {
 
 TEST(PropertyList, TagOneOverAnyNumberIsADate) {
   const std::pair<const char*, double> dates[] = {{"c11a514b67b0", 1363896240.0},
-                                                  {"c1fb41d452d9e8200000", 1363896240.5},
+                                                  {"c1fb41d452d9ec200000", 1363896240.5},
                                                   {"c120", -1.0},
                                                   {"c1f93e00", 1.5},
                                                   {"c1fa47c35000", 100000.0},
