@@ -1,0 +1,113 @@
+// Each remote operation as it reaches the service, and its result as it reaches the owner.
+#include <gtest/gtest.h>
+
+#include "tests/client/ScriptedServer.h"
+
+namespace tarn::client {
+namespace {
+
+using testing::Pair;
+using testing::Served;
+using wire::Operation;
+
+// Runs the call against a server that answers with the results; returns the request that the server saw.
+template <class Call>
+wire::DecodedRequest requestOf(Pair& pair, std::initializer_list<plist::ValueView> results, const Call& call) {
+  wire::DecodedRequest seen;
+  {
+    const Served serving([&] {
+      seen = pair.server->take().value();
+      pair.server->reply(seen.id, results);
+    });
+    call(*pair.client);
+  }
+  return seen;
+}
+
+TEST(TypedCalls, OperationsOnOneSession) {
+  using Method = Reply (TarnReportingClient::*)(std::int64_t);
+  const std::pair<Method, Operation> methods[] = {
+      {&TarnReportingClient::createReportingSession, Operation::CreateReportingSession},
+      {&TarnReportingClient::getServiceNameForReporterID, Operation::GetServiceNameForReporterID},
+      {&TarnReportingClient::stopReportingSessionForID, Operation::StopReportingSessionForID},
+      {&TarnReportingClient::destroyReportingSession, Operation::DestroyReportingSession},
+      {&TarnReportingClient::reporterID, Operation::ReporterID}};
+  for (const auto& [method, operation] : methods) {
+    Pair pair;
+    const auto seen =
+        requestOf(pair, {true}, [call = method](TarnReportingClient& client) { EXPECT_TRUE((client.*call)(-7).ok()); });
+    EXPECT_EQ(seen.operation, operation);
+    EXPECT_EQ(seen.reporterID, -7);
+  }
+}
+
+TEST(TypedCalls, SetServiceType) {
+  Pair pair;
+  const auto seen =
+      requestOf(pair, {true}, [](TarnReportingClient& client) { EXPECT_TRUE(client.setServiceType(11, 5).ok()); });
+  EXPECT_EQ(seen.operation, Operation::SetServiceType);
+  EXPECT_EQ(seen.serviceType, 11);
+  EXPECT_EQ(seen.reporterID, 5);
+}
+
+TEST(TypedCalls, SetConfiguration) {
+  Pair pair;
+  const auto seen = requestOf(pair, {true}, [](TarnReportingClient& client) {
+    EXPECT_TRUE(client.setConfiguration({{"a", 1}}, 5).ok());
+  });
+  EXPECT_EQ(seen.operation, Operation::SetConfiguration);
+  EXPECT_EQ(seen.dictionary, (plist::Dictionary{{"a", 1}}));
+}
+
+TEST(TypedCalls, SendMessage) {
+  Pair pair;
+  const auto seen = requestOf(pair, {}, [](TarnReportingClient& client) {
+    EXPECT_TRUE(client.sendMessage({{"a", 1}}, 4, 2, std::vector<std::int64_t>{5, 6}).ok());
+  });
+  EXPECT_EQ(seen.operation, Operation::SendMessage);
+  EXPECT_EQ(seen.category, 4U);
+  EXPECT_EQ(seen.type, 2);
+  EXPECT_EQ(seen.reporterIDs, (std::vector<std::int64_t>{5, 6}));
+}
+
+TEST(TypedCalls, GetServiceNameAnswersANumber) {
+  Pair pair;
+  requestOf(pair, {65535},
+            [](TarnReportingClient& client) { EXPECT_EQ(client.getServiceNameForReporterID(5).number(), 65535); });
+}
+
+TEST(TypedCalls, GetAllReportersAnswersNumbers) {
+  Pair pair;
+  const plist::Array ids{5, -6};
+  const auto seen = requestOf(pair, {ids}, [](TarnReportingClient& client) {
+    EXPECT_EQ(client.getAllReporters().numbers(), (std::vector<std::int64_t>{5, -6}));
+  });
+  EXPECT_EQ(seen.operation, Operation::GetAllReporters);
+}
+
+TEST(TypedCalls, StatusAnswersADictionary) {
+  Pair pair;
+  const plist::Dictionary status{{"sessions", 3}};
+  const auto seen =
+      requestOf(pair, {status}, [&](TarnReportingClient& client) { EXPECT_EQ(client.status().dictionary(), status); });
+  EXPECT_EQ(seen.operation, Operation::Status);
+}
+
+TEST(TypedCalls, StartIsSentAndDoesNotWait) {
+  Pair pair;
+  EXPECT_EQ(pair.client->startReportingSessionForID(5), SendStatus::Sent);
+  pair.client->flush();
+  EXPECT_EQ(pair.server->take()->operation, Operation::StartReportingSessionForID);
+}
+
+TEST(TypedCalls, ResultsOfAnotherKindReadAsNothing) {
+  Reply reply;
+  EXPECT_EQ(reply.number(), 0);
+  reply.results.emplace_back("text");
+  EXPECT_EQ(reply.number(), 0);
+  EXPECT_TRUE(reply.dictionary().empty());
+  EXPECT_TRUE(reply.numbers().empty());
+}
+
+}  // namespace
+}  // namespace tarn::client
