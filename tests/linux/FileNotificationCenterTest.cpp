@@ -22,8 +22,8 @@
 namespace tarn::linux_host {
 namespace {
 
-using testing::eventually;
 using platform::NotificationCenter;
+using testing::eventually;
 
 constexpr const char* kName = "sys.oxbow.ringer";
 

@@ -14,8 +14,8 @@
 namespace tarn::linux_host {
 namespace {
 
-using testing::eventually;
 using platform::ThermalState;
+using testing::eventually;
 
 class RecordedFacts : public ::testing::Test {
  protected:

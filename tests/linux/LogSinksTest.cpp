@@ -21,8 +21,8 @@
 namespace tarn::linux_host {
 namespace {
 
-using testing::eventually;
 using platform::LogLevel;
+using testing::eventually;
 
 constexpr platform::LogCategory kCategory{"sys.oxbow.tarnkit", "tarnss"};
 constexpr const char* kTime = "1970-01-01T00:00:05.000000Z";
