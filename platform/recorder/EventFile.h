@@ -7,8 +7,7 @@
 // that none is given twice even when nothing is left. Only commit() makes anything true: behind a rollback the same
 // events get the same ids.
 //
-// A rollback-free reading of the answers: after anything but Done the transaction is over and rolled back, and
-// problem() says why in words.
+// After any answer but Done the transaction is over and rolled back, and problem() says why in words.
 #pragma once
 
 #include <chrono>

@@ -108,7 +108,7 @@ bool EventWriter::settle() {
     faulty_ = false;
     const double seconds = std::chrono::duration<double>(clock_.monotonic() - faultSince_).count();
     char took[32];
-    std::snprintf(took, sizeof took, "%.1f", seconds);
+    static_cast<void>(std::snprintf(took, sizeof took, "%.1f", seconds));
     log_.notice("recorder writes to " + file_.path().string() + " again, after " + took + " seconds");
   }
   return true;
