@@ -141,6 +141,8 @@ class Host final : public platform::ProcessControl {
     recorder_.setRoomHandler([this] { connections_.resumeRequests(); });
     connections_.gate.setPauseSource([this] { return recorder_.isFull(); });
     recorder_.start();
+    // A large file is read through first; until that is over nothing could be committed in time.
+    recorder_.waitUntilOpened();
   }
 
   plist::Dictionary status() {
