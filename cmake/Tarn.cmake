@@ -79,9 +79,19 @@ function(tarn_test name)
   gtest_discover_tests(${name} DISCOVERY_MODE PRE_TEST DISCOVERY_TIMEOUT 60 PROPERTIES TIMEOUT ${arg_TIMEOUT})
 endfunction()
 
-# tarn_fuzzer(NAME SOURCES file... [DEPENDS target...]): a libFuzzer program; its seeds lie in fuzz/corpus/NAME.
+# tarn_fuzzer(NAME SOURCES file... [DEPENDS target...]): a fuzzer, whose sources define LLVMFuzzerTestOneInput. With
+# TARN_FUZZ it is a libFuzzer program; with TARN_TESTS a test replays its seeds, which lie in fuzz/corpus/NAME.
 function(tarn_fuzzer name)
   cmake_parse_arguments(PARSE_ARGV 1 arg "" "" "SOURCES;DEPENDS")
-  tarn_program(${name} SOURCES ${arg_SOURCES} DEPENDS ${arg_DEPENDS})
-  target_link_options(${name} PRIVATE -fsanitize=fuzzer)
+  if(TARN_FUZZ)
+    tarn_program(${name} SOURCES ${arg_SOURCES} DEPENDS ${arg_DEPENDS})
+    target_link_options(${name} PRIVATE -fsanitize=fuzzer)
+  endif()
+  if(TARN_TESTS)
+    add_executable(${name}Replay ${arg_SOURCES} "${PROJECT_SOURCE_DIR}/tests/fuzz/ReplayMain.cpp")
+    set_target_properties(${name}Replay PROPERTIES RUNTIME_OUTPUT_DIRECTORY "${PROJECT_BINARY_DIR}/tests")
+    target_link_libraries(${name}Replay PRIVATE tarn_options ${arg_DEPENDS})
+    add_test(NAME ${name}.ReplaysItsSeeds COMMAND ${name}Replay "${PROJECT_SOURCE_DIR}/fuzz/corpus/${name}")
+    set_tests_properties(${name}.ReplaysItsSeeds PROPERTIES TIMEOUT 120)
+  endif()
 endfunction()

@@ -1,6 +1,7 @@
 // The rules of threads and handlers, and use by several threads in turn.
 #include <gtest/gtest.h>
 
+#include <atomic>
 #include <mutex>
 
 #include "tests/client/ScriptedServer.h"
