@@ -19,7 +19,7 @@ std::uint64_t hashSeed() noexcept {
   return static_cast<std::uint64_t>(reinterpret_cast<std::uintptr_t>(&anchor));
 }
 
-__extension__ typedef unsigned __int128 Product;
+__extension__ typedef unsigned __int128 Product;  // NOLINT(modernize-use-using): only so is it an extension
 
 // Both halves of the product, folded. The factors hold secrets, so no text makes one of them zero on purpose.
 std::uint64_t mix(std::uint64_t a, std::uint64_t b) noexcept {
