@@ -1,0 +1,36 @@
+// BareReceiver: the limit that the socket itself sets. A process that takes frames of our sizes in large gulps, answers
+// each with as many bytes as the service does, and looks at nothing but the lengths.
+#pragma once
+
+#include <string>
+
+#include "bench/Processes.h"
+#include "bench/Receiver.h"
+
+namespace tarn::bench {
+
+class BareReceiver final : public Receiver {
+ public:
+  explicit BareReceiver(Writes writes);
+  ~BareReceiver() override;
+  BareReceiver(const BareReceiver&) = delete;
+  BareReceiver& operator=(const BareReceiver&) = delete;
+
+  void roundTrip() override;
+  void stream(std::size_t count, std::size_t outstanding) override;
+  double processorSeconds() const override { return bench::processorSeconds(child_.id()); }
+
+ private:
+  void send(std::string_view bytes) const;
+  std::size_t receiveReplies();
+
+  const Writes writes_;
+  SocketPair ends_;
+  ChildProcess child_;
+  std::string frame_;
+  std::string gathered_;
+  std::string received_;
+  std::size_t pendingBytes_ = 0;  // of a reply that came in part
+};
+
+}  // namespace tarn::bench

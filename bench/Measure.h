@@ -1,0 +1,45 @@
+// Measuring: the clock, medians, and how figures are written.
+//
+// Machines are noisy, so what is compared takes turns: a round measures ours and each peer once, and the figures are
+// the medians over the rounds.
+#pragma once
+
+#include <cstddef>
+#include <string>
+#include <vector>
+
+namespace tarn::bench {
+
+// Of the steady clock.
+double nowSeconds();
+
+using Samples = std::vector<double>;
+// Of at least one sample.
+double median(Samples samples);
+// The sample that so large a part (0 to 1) of them doesn't exceed.
+double percentile(Samples samples, double part);
+
+// Nanoseconds that one call takes, on average over `count` of them.
+template <class Call>
+double nanosecondsEach(std::size_t count, Call&& call) {
+  const double start = nowSeconds();
+  for (std::size_t i = 0; i < count; ++i) {
+    call(i);
+  }
+  return (nowSeconds() - start) * 1e9 / static_cast<double>(count);
+}
+
+// Keeps the compiler from leaving out what made the value.
+template <class Value>
+inline void keep(const Value& value) {
+  asm volatile("" : : "r,m"(value) : "memory");
+}
+
+// "7.52 us", "412 ns", "634 k/s", "187 B"
+std::string microseconds(double seconds);
+std::string nanoseconds(double nanoseconds);
+std::string perSecond(double rate);
+std::string bytes(double count);
+std::string times(double ratio);
+
+}  // namespace tarn::bench

@@ -1,0 +1,73 @@
+#include "bench/ServiceProcess.h"
+
+#include <signal.h>
+#include <sys/prctl.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cstdlib>
+#include <fstream>
+
+#include "bench/Measure.h"
+#include "client/Socket.h"
+
+namespace tarn::bench {
+
+namespace {
+
+constexpr double kReadySeconds = 20;
+
+}  // namespace
+
+ServiceProcess::ServiceProcess(const Settings& settings, const ServiceSetup& setup) : directory_(settings.directory) {
+  writeConfiguration(setup);
+  start(settings.serviceFile);
+  waitUntilReady();
+}
+
+ServiceProcess::~ServiceProcess() {
+  ::kill(id_, SIGTERM);
+  ::waitpid(id_, nullptr, 0);
+}
+
+void ServiceProcess::writeConfiguration(const ServiceSetup& setup) const {
+  std::ofstream file(directory_.path() + "/config.toml");
+  file << "[tally]\nin_use = [" << (setup.recordsEvents ? "\"*\"" : "") << "]\n"
+       << "[recorder]\nmax_megabytes = " << setup.maxMegabytes << '\n';
+}
+
+void ServiceProcess::start(const std::string& program) {
+  const std::string state = directory_.path() + "/state";
+  const std::string configuration = directory_.path() + "/config.toml";
+  const std::string socket = socketPath();
+  id_ = ::fork();
+  if (id_ < 0) {
+    fail("can't start a process");
+  }
+  if (id_ == 0) {
+    ::prctl(PR_SET_PDEATHSIG, SIGTERM);
+    ::execl(program.c_str(), program.c_str(), "--socket", socket.c_str(), "--state-dir", state.c_str(), "--config",
+            configuration.c_str(), "--log-level", "error", nullptr);
+    std::_Exit(127);
+  }
+}
+
+void ServiceProcess::waitUntilReady() const {
+  const double latest = nowSeconds() + kReadySeconds;
+  for (;;) {
+    int errorNumber = 0;
+    std::string error;
+    if (client::Socket::connect(socketPath(), errorNumber, error).open()) {
+      return;
+    }
+    if (::waitpid(id_, nullptr, WNOHANG) != 0) {
+      fail("the service ended at once");
+    }
+    if (nowSeconds() > latest) {
+      fail("the service doesn't answer: " + error);
+    }
+    ::usleep(2000);
+  }
+}
+
+}  // namespace tarn::bench

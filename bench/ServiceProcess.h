@@ -1,0 +1,48 @@
+// ServiceProcess: a tarnreportingd of its own, on a private socket and state directory, ended with the object.
+#pragma once
+
+#include <sys/types.h>
+
+#include <string>
+
+#include "bench/Processes.h"
+
+namespace tarn::bench {
+
+// How a run of the program measures.
+struct Settings {
+  bool quick = false;
+  int rounds = 7;           // how often each figure is measured
+  std::string directory;    // where the services keep their state
+  std::string serviceFile;  // the program of the service
+
+  // A count for a full run, cut to a small part for a quick one.
+  std::size_t count(std::size_t full) const { return quick ? full / 50 + 1 : full; }
+};
+
+struct ServiceSetup {
+  bool recordsEvents = false;  // whether somebody wants every event, or nobody any
+  int maxMegabytes = 65536;    // retention; the default never bites here
+};
+
+class ServiceProcess {
+ public:
+  // Waits until the service accepts connections.
+  ServiceProcess(const Settings& settings, const ServiceSetup& setup);
+  ~ServiceProcess();
+  ServiceProcess(const ServiceProcess&) = delete;
+  ServiceProcess& operator=(const ServiceProcess&) = delete;
+
+  pid_t id() const noexcept { return id_; }
+  std::string socketPath() const { return directory_.path() + "/socket"; }
+
+ private:
+  void writeConfiguration(const ServiceSetup& setup) const;
+  void start(const std::string& program);
+  void waitUntilReady() const;
+
+  TemporaryDirectory directory_;
+  pid_t id_ = -1;
+};
+
+}  // namespace tarn::bench

@@ -1,0 +1,92 @@
+#include "bench/ServiceReceiver.h"
+
+#include <unistd.h>
+
+#include "bench/Message.h"
+
+namespace tarn::bench {
+
+namespace {
+
+constexpr std::uint16_t kGenericService = 0;
+constexpr std::chrono::milliseconds kPatience{10'000};
+
+void mustBeOk(const client::Reply& reply, const char* what) {
+  if (!reply.ok()) {
+    fail(std::string(what) + ": " + reply.error.text);
+  }
+}
+
+}  // namespace
+
+ServiceReceiver::ServiceReceiver(const Settings& settings, const ServiceSetup& setup, Writes writes)
+    : service_(settings, setup), request_(makeRequest()) {
+  client::Options options;
+  options.autoFlushBytes = writes == Writes::OneEach ? 0 : options.autoFlushBytes;
+  client::TarnReportingClient::Connected connected =
+      client::TarnReportingClient::connect(service_.socketPath(), options);
+  if (!connected.client) {
+    fail(connected.error);
+  }
+  client_ = std::move(connected.client);
+  mustBeOk(client_->createReportingSession(kReporterID), "creating the session");
+  mustBeOk(client_->setServiceType(kGenericService, kReporterID), "setting the service type");
+  mustBeOk(client_->setConfiguration({{"HostApplicationDisplayID", "sys.oxbow.music"}}, kReporterID), "configuring");
+  start();
+}
+
+void ServiceReceiver::start() {
+  client_->startReportingSessionForID(kReporterID);
+  client_->flush();
+}
+
+void ServiceReceiver::forget() {
+  mustBeOk(client_->stopReportingSessionForID(kReporterID), "stopping the session");
+  start();
+}
+
+void ServiceReceiver::roundTrip() {
+  renumber(request_, ++number_);
+  mustBeOk(client_->call(request_), "sending a message");
+}
+
+void ServiceReceiver::stream(std::size_t count, std::size_t outstanding) {
+  replies_ = 0;
+  failures_ = 0;
+  const auto handler = [this](client::Reply&& reply) {
+    ++replies_;
+    if (!reply.ok()) ++failures_;
+  };
+  std::size_t sent = 0;
+  while (replies_ < count) {
+    for (; sent < count && sent - replies_ < outstanding; ++sent) {
+      renumber(request_, ++number_);
+      if (client_->send(request_, handler) != client::SendStatus::Sent) {
+        fail("the service went away");
+      }
+    }
+    if (client_->wait(kPatience) == 0) {
+      fail("the service doesn't answer");
+    }
+  }
+  if (failures_ != 0) {
+    fail("a message was refused");
+  }
+}
+
+std::int64_t ServiceReceiver::waitUntilCommitted() {
+  for (;;) {
+    const client::Reply reply = client_->call(client::status());
+    mustBeOk(reply, "asking for the status");
+    const plist::Dictionary status = reply.dictionary();
+    if (status["recorder_failed"].asInt64() != 0) {
+      fail("the recorder lost events");
+    }
+    if (status["recorder_committed"].asInt64() == status["recorder_handed_over"].asInt64()) {
+      return status["recorder_committed"].asInt64();
+    }
+    ::usleep(1000);
+  }
+}
+
+}  // namespace tarn::bench
