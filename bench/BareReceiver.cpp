@@ -3,6 +3,7 @@
 #include <sys/socket.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <cstring>
 
 #include "bench/Message.h"
@@ -76,47 +77,54 @@ BareReceiver::~BareReceiver() {
   ::close(ends_.ours);
 }
 
-void BareReceiver::send(std::string_view bytes) const {
-  sendAll(ends_.ours, bytes);
+// Takes replies in while the peer takes nothing, as both would wait for ever otherwise.
+void BareReceiver::send(std::string_view bytes) {
+  while (!bytes.empty()) {
+    const ssize_t sent = ::send(ends_.ours, bytes.data(), bytes.size(), MSG_NOSIGNAL | MSG_DONTWAIT);
+    if (sent > 0) {
+      bytes.remove_prefix(static_cast<std::size_t>(sent));
+    } else if (errno == EAGAIN) {
+      receiveReplies();
+    } else {
+      fail("the bare peer went away");
+    }
+  }
 }
 
-// Waits for at least one byte; how many replies came to their end.
-std::size_t BareReceiver::receiveReplies() {
+// Waits for at least one byte, and counts the replies that came to their end.
+void BareReceiver::receiveReplies() {
   static const std::size_t kReplyBytes = makeReply().size();
   const ssize_t bytes = ::recv(ends_.ours, received_.data(), received_.size(), 0);
   if (bytes <= 0) {
     fail("the bare peer went away");
   }
   pendingBytes_ += static_cast<std::size_t>(bytes);
-  const std::size_t replies = pendingBytes_ / kReplyBytes;
+  replies_ += pendingBytes_ / kReplyBytes;
   pendingBytes_ %= kReplyBytes;
-  return replies;
 }
 
 void BareReceiver::roundTrip() {
+  replies_ = 0;
   send(frame_);
-  while (receiveReplies() == 0) {
+  while (replies_ == 0) {
+    receiveReplies();
   }
 }
 
 void BareReceiver::stream(std::size_t count, std::size_t outstanding) {
+  replies_ = 0;
   std::size_t sent = 0;
-  std::size_t replies = 0;
-  while (replies < count) {
-    for (; sent < count && sent - replies < outstanding; ++sent) {
-      if (writes_ == Writes::OneEach) {
-        send(frame_);
-        continue;
-      }
+  while (replies_ < count) {
+    for (; sent < count && sent - replies_ < outstanding; ++sent) {
       gathered_ += frame_;
-      if (gathered_.size() >= kGulpBytes) {
+      if (writes_ == Writes::OneEach || gathered_.size() >= kGulpBytes) {
         send(gathered_);
         gathered_.clear();
       }
     }
     send(gathered_);
     gathered_.clear();
-    replies += receiveReplies();
+    receiveReplies();
   }
 }
 

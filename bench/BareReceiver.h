@@ -21,8 +21,8 @@ class BareReceiver final : public Receiver {
   double processorSeconds() const override { return bench::processorSeconds(child_.id()); }
 
  private:
-  void send(std::string_view bytes) const;
-  std::size_t receiveReplies();
+  void send(std::string_view bytes);
+  void receiveReplies();
 
   const Writes writes_;
   SocketPair ends_;
@@ -31,6 +31,7 @@ class BareReceiver final : public Receiver {
   std::string gathered_;
   std::string received_;
   std::size_t pendingBytes_ = 0;  // of a reply that came in part
+  std::size_t replies_ = 0;
 };
 
 }  // namespace tarn::bench
