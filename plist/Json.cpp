@@ -1,7 +1,5 @@
 #include "plist/Json.h"
 
-#include <array>
-#include <charconv>
 #include <cmath>
 
 #include "plist/CalendarDate.h"
@@ -86,12 +84,6 @@ void appendJsonDate(std::string& out, Date date) {
   out += "Z\"";
 }
 
-void appendInteger(std::string& out, auto value) {
-  std::array<char, 24> digits;
-  const auto result = std::to_chars(digits.begin(), digits.end(), value);
-  out.append(digits.data(), result.ptr);
-}
-
 void appendJsonArray(std::string& out, const Array& array) {
   out += '[';
   bool first = true;
@@ -164,9 +156,9 @@ void appendJson(std::string& out, const ValueView& value) {
       out += value.boolValue() ? "true" : "false";
       return;
     case Kind::Signed:
-      return appendInteger(out, value.signedValue());
+      return appendNumber(out, value.signedValue());
     case Kind::Unsigned:
-      return appendInteger(out, value.unsignedValue());
+      return appendNumber(out, value.unsignedValue());
     case Kind::Float:
       return appendJsonNumber(out, value.floatValue());
     case Kind::Double:

@@ -6,6 +6,9 @@
 namespace tarn::plist {
 
 std::optional<KeyList> KeyListCache::find(std::uint64_t hash, std::span<const std::string_view> texts) {
+  if (texts.size() > kLongestKept) {
+    return KeyList::make(texts);
+  }
   if (slots_.empty()) {
     slots_.resize(kSlots);
   }

@@ -15,7 +15,8 @@
 
 namespace tarn::plist {
 
-// Key lists seen lately, found by their texts without the process-wide lock. Bounded: 256 lists.
+// Key lists seen lately, found by their texts without the process-wide lock. Bounded: 256 lists of at most 64 keys
+// each; a longer list is made anew every time, so that nobody can fill the cache with huge ones.
 class KeyListCache {
  public:
   // The list of these texts, whose combined hash is `hash`; nothing when a text stands there twice.
@@ -23,6 +24,7 @@ class KeyListCache {
 
  private:
   static constexpr std::size_t kSlots = 256;
+  static constexpr std::size_t kLongestKept = 64;
   std::vector<KeyList> slots_;
 };
 

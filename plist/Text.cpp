@@ -143,6 +143,14 @@ void appendNumber(std::string& out, float value) {
   appendShortest(out, value);
 }
 
+void appendNumber(std::string& out, std::int64_t value) {
+  appendInteger(out, value);
+}
+
+void appendNumber(std::string& out, std::uint64_t value) {
+  appendInteger(out, value);
+}
+
 void appendDescription(std::string& out, const ValueView& value) {
   switch (value.kind()) {
     case Kind::None:
@@ -152,9 +160,9 @@ void appendDescription(std::string& out, const ValueView& value) {
       out += value.boolValue() ? '1' : '0';
       return;
     case Kind::Signed:
-      return appendInteger(out, value.signedValue());
+      return appendNumber(out, value.signedValue());
     case Kind::Unsigned:
-      return appendInteger(out, value.unsignedValue());
+      return appendNumber(out, value.unsignedValue());
     case Kind::Float:
       return appendNumber(out, value.floatValue());
     case Kind::Double:

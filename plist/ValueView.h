@@ -117,8 +117,10 @@ bool operator==(const ValueView& a, const ValueView& b) noexcept;
 std::string description(const ValueView& value);
 void appendDescription(std::string& out, const ValueView& value);
 
-// The shortest decimal form alone, for numbers that are not in a value.
+// The text form of a number alone, for numbers that are not in a value.
 void appendNumber(std::string& out, double value);
 void appendNumber(std::string& out, float value);
+void appendNumber(std::string& out, std::int64_t value);
+void appendNumber(std::string& out, std::uint64_t value);
 
 }  // namespace tarn::plist

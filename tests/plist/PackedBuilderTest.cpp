@@ -76,5 +76,23 @@ TEST(KeyListCache, StaysRightWhenListsShareASlot) {
   }
 }
 
+TEST(KeyListCache, KeepsNoLongLists) {
+  const std::size_t before = KeyList::aliveCount();
+  KeyListCache cache;
+  PackedBuilder builder;
+  for (const std::size_t count : {std::size_t{64}, std::size_t{65}, std::size_t{1000}}) {
+    std::vector<std::string> names;
+    for (std::size_t i = 0; i < count; ++i) {
+      names.push_back("long" + std::to_string(count) + "," + std::to_string(i));
+    }
+    builder.begin();
+    for (const std::string& name : names) {
+      builder.add(name, 1);
+    }
+    EXPECT_EQ(builder.finishDictionary(cache)->size(), count);
+    EXPECT_EQ(KeyList::aliveCount(), before + 1);  // the one of 64 keys alone
+  }
+}
+
 }  // namespace
 }  // namespace tarn::plist
