@@ -66,6 +66,25 @@ std::size_t findIndexed(const KeyListBody& body, std::uint64_t hash, const Match
   return KeyList::npos;
 }
 
+// The list that `body` was extended to by this key before, with one more reference; null when it was not. The caller
+// holds `body`, which holds that list.
+KeyListBody* extendedBefore(const KeyListBody& body, const Key& key) noexcept {
+  KeyListBody* const extended = body.extended.load(std::memory_order_acquire);
+  if (extended == nullptr || !(extended->keys()[body.count] == key)) {
+    return nullptr;
+  }
+  detail::retainKeyList(extended);
+  return extended;
+}
+
+void rememberExtended(KeyListBody& body, KeyListBody* extended) noexcept {
+  KeyListBody* none = nullptr;
+  detail::retainKeyList(extended);
+  if (!body.extended.compare_exchange_strong(none, extended, std::memory_order_release, std::memory_order_relaxed)) {
+    detail::releaseKeyList(extended);
+  }
+}
+
 void destroyBody(KeyListBody* body) noexcept {
   std::destroy_n(body->keys(), body->count);
   body->~KeyListBody();
@@ -141,19 +160,20 @@ bool hasRepeats(std::span<const Key> keys) {
 namespace detail {
 
 void releaseKeyList(KeyListBody* body) noexcept {
-  if (body == nullptr || !releaseUnlessLast(body->references)) {
-    return;
-  }
-  Table& all = table();
-  {
-    const std::lock_guard lock(all.mutex);
-    if (body->references.fetch_sub(1, std::memory_order_acq_rel) != 1) {
-      return;
+  while (body != nullptr && releaseUnlessLast(body->references)) {
+    Table& all = table();
+    {
+      const std::lock_guard lock(all.mutex);
+      if (body->references.fetch_sub(1, std::memory_order_acq_rel) != 1) {
+        return;
+      }
+      const auto [begin, end] = all.lists.equal_range(body->hash);
+      all.lists.erase(std::find_if(begin, end, [&](const auto& entry) { return entry.second == body; }));
     }
-    const auto [begin, end] = all.lists.equal_range(body->hash);
-    all.lists.erase(std::find_if(begin, end, [&](const auto& entry) { return entry.second == body; }));
+    KeyListBody* const extended = body->extended.load(std::memory_order_acquire);
+    destroyBody(body);
+    body = extended;  // its reference goes with the list that held it
   }
-  destroyBody(body);
 }
 
 }  // namespace detail
@@ -225,8 +245,15 @@ std::uint64_t KeyList::combineHash(std::uint64_t hash, std::uint64_t keyHash) no
 }
 
 KeyList KeyList::appending(const Key& key) const {
+  if (KeyListBody* const known = body_ == nullptr ? nullptr : extendedBefore(*body_, key)) {
+    return KeyList(known);
+  }
   const std::span<const Key> head(body_ == nullptr ? nullptr : body_->keys(), size());
-  return KeyList(internList(head, &key, combineHash(hash(), key.hash())));
+  KeyListBody* const made = internList(head, &key, combineHash(hash(), key.hash()));
+  if (body_ != nullptr) {
+    rememberExtended(*body_, made);
+  }
+  return KeyList(made);
 }
 
 KeyList KeyList::removing(std::size_t index) const {

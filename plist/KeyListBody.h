@@ -17,6 +17,9 @@ struct KeyListBody {
   std::unique_ptr<std::uint32_t[]> index;  // of long lists: position + 1 by hash, 0 for a free slot
   std::size_t indexMask = 0;
   bool hasBlanks = false;
+  // The first list that was made of this one by a key behind it, set once and held: whoever adds keys to dictionaries
+  // adds the same ones in the same order, and would else make the list and drop it with every dictionary.
+  std::atomic<KeyListBody*> extended{nullptr};
 
   Key* keys() noexcept { return reinterpret_cast<Key*>(this + 1); }
   const Key* keys() const noexcept { return reinterpret_cast<const Key*>(this + 1); }

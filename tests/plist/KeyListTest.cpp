@@ -74,6 +74,32 @@ TEST(KeyList, ListThatNobodyUsesIsForgotten) {
   EXPECT_EQ(KeyList::aliveCount(), before);
 }
 
+TEST(KeyList, ExtensionIsKeptWithTheListThatItExtends) {
+  const std::size_t before = KeyList::aliveCount();
+  {
+    const Dictionary base{{"only of this test", 1}};
+    const std::size_t withBase = KeyList::aliveCount();
+    for (int i = 0; i < 2; ++i) {
+      Dictionary longer = base;
+      longer.set("extension", i);
+      EXPECT_EQ(KeyList::aliveCount(), withBase + 1);
+    }
+    EXPECT_EQ(KeyList::aliveCount(), withBase + 1);
+  }
+  EXPECT_EQ(KeyList::aliveCount(), before);
+}
+
+TEST(KeyList, ListExtendedByDifferentKeysGivesEachItsOwnList) {
+  const Dictionary base{{"base", 1}};
+  for (const char* const key : {"one", "other", "one", "other"}) {
+    Dictionary longer = base;
+    longer.set(key, 2);
+    ASSERT_EQ(longer.size(), 2U);
+    EXPECT_EQ(longer.keys()[1].text(), key);
+    EXPECT_EQ(longer[key].asInt64(), 2);
+  }
+}
+
 TEST(KeyListStress, ThreadsMakeAndDropTheSameListsAtOnce) {
   const std::size_t before = KeyList::aliveCount();
   std::vector<std::thread> threads;
