@@ -129,9 +129,9 @@ void TarnReportingClientServerInstance::sendMessage(plist::Dictionary message, s
       message.set("sendSingleMessage", true);
     }
   }
-  onServerQueue([self = shared_from_this(), message = std::move(message), category, type,
-                 reporterIDs = std::move(reporterIDs),
-                 reply = std::move(reply)]() mutable { self->send(message, category, type, reporterIDs, reply); });
+  onServerQueue(
+      [self = shared_from_this(), message = std::move(message), category, type, reporterIDs = std::move(reporterIDs),
+       reply = std::move(reply)]() mutable { self->send(std::move(message), category, type, reporterIDs, reply); });
 }
 
 void TarnReportingClientServerInstance::stopReportingSessionForID(std::int64_t reporterID,
@@ -284,9 +284,8 @@ void TarnReportingClientServerInstance::destroy(std::int64_t reporterID) {
   logReportingSessions();
 }
 
-void TarnReportingClientServerInstance::send(const plist::Dictionary& message, std::uint32_t category,
-                                             std::uint16_t type, const platform::ReporterIDs& reporterIDs,
-                                             platform::Reply<>& reply) {
+void TarnReportingClientServerInstance::send(plist::Dictionary message, std::uint32_t category, std::uint16_t type,
+                                             const platform::ReporterIDs& reporterIDs, platform::Reply<>& reply) {
   plist::Array storage;
   log(LogLevel::Debug, "sending message for reporter %@", [&] { return textOf(reporterIDs, storage); });
   trace(kTraceSend, processIdentifier_);
@@ -295,9 +294,12 @@ void TarnReportingClientServerInstance::send(const plist::Dictionary& message, s
     reply(platform::RemoteError{kErrorDomain, kReportingDisabled, "reporting is disabled"});
     return;
   }
-  for (const auto& session : service->findReportingSessionsForIDs(reporterIDs)) {
+  const auto sessions = service->findReportingSessionsForIDs(reporterIDs);
+  for (const auto& session : sessions) {
+    // Each session changes its own; the last one, mostly the only one, needs no copy for it.
+    plist::Dictionary own = &session == &sessions.back() ? std::move(message) : message;
     session->sendMessage(std::make_shared<TarnReportingSessionMessage>(
-        message, static_cast<AudioEventCategory>(category), static_cast<AudioEventType>(type)));
+        std::move(own), static_cast<AudioEventCategory>(category), static_cast<AudioEventType>(type)));
   }
   reply(std::nullopt);
 }

@@ -68,7 +68,7 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
   void start(std::int64_t reporterID, platform::Acknowledge reply);
   void stop(std::int64_t reporterID);
   void destroy(std::int64_t reporterID);
-  void send(const plist::Dictionary& message, std::uint32_t category, std::uint16_t type,
+  void send(plist::Dictionary message, std::uint32_t category, std::uint16_t type,
             const platform::ReporterIDs& reporterIDs, platform::Reply<>& reply);
   void endClient();
 

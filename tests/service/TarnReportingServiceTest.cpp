@@ -138,6 +138,15 @@ TEST_F(TarnReportingServiceTest, SessionsOfOneMessageNeverShareARecord) {
   EXPECT_EQ(second->message()["a"].asInt64(), 1);
 }
 
+TEST_F(TarnReportingServiceTest, SessionNamedTwiceGetsTheWholeMessageTwice) {
+  const Client client = connect(41);
+  create(client, 10);
+  send(client, {{"a", 1}}, std::vector<std::int64_t>{10, 10});
+  EXPECT_EQ(sessionOf(0, 10)->totalMessageCount(), 2);
+  ASSERT_EQ(sessionOf(0, 10)->messages().size(), 1U);  // the second says the same, so it is redundant
+  EXPECT_EQ(sessionOf(0, 10)->messages().at(0)->message()["a"].asInt64(), 1);
+}
+
 TEST_F(TarnReportingServiceTest, FirstClientInOrderOfConnectionWinsAnID) {
   const Client one = connect(41);
   const Client other = connect(42);
