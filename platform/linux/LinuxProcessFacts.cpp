@@ -14,6 +14,7 @@
 
 #include "platform/linux/HostLog.h"
 #include "platform/linux/SmallFile.h"
+#include "wire/Utf8.h"
 
 namespace tarn::linux_host {
 
@@ -42,6 +43,13 @@ std::optional<std::int64_t> readNumber(const std::string& path) {
     return std::nullopt;
   }
   return number;
+}
+
+// A process may call itself any bytes, and the kernel cuts names inside a character; what is recorded is text.
+std::string asText(std::string_view name) {
+  std::string text;
+  wire::appendMendedUtf8(text, name);
+  return text;
 }
 
 std::string_view baseName(std::string_view path) {
@@ -153,14 +161,14 @@ std::optional<std::string> LinuxProcessFacts::processName(std::int32_t processId
     name.pop_back();
   }
   if (name.size() < kKernelNameBytes) {
-    return name;
+    return asText(name);
   }
   for (const std::string& whole : {executableName(folder), firstArgumentName(folder)}) {
     if (whole.starts_with(name)) {
-      return whole;
+      return asText(whole);
     }
   }
-  return name;
+  return asText(name);
 }
 
 platform::ProcessFacts::Footprint LinuxProcessFacts::physicalFootprint() const {

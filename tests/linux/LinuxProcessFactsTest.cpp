@@ -47,6 +47,15 @@ TEST_F(RecordedFacts, ProcessNameKeepsBlanksAndLineEndsInside) {
   EXPECT_EQ(facts_.processName(7), "a b\nc");
 }
 
+TEST_F(RecordedFacts, ProcessNameIsTextWhateverItsBytes) {
+  folder_.write("7/comm", "a\xFF\xC3z\n");
+  EXPECT_EQ(facts_.processName(7), "a\uFFFD\uFFFDz");
+  folder_.write("8/comm", "fourteen-bytes\xC3\n");  // cut inside a character
+  EXPECT_EQ(facts_.processName(8), "fourteen-bytes\uFFFD");
+  std::filesystem::create_symlink("/usr/bin/fourteen-bytes\u00E9", folder_.path("8/exe"));
+  EXPECT_EQ(facts_.processName(8), "fourteen-bytes\u00E9");
+}
+
 TEST_F(RecordedFacts, NameThatTheKernelCutIsCompletedByTheExecutable) {
   folder_.write("7/comm", "telephony-engin\n");
   std::filesystem::create_symlink("/usr/bin/telephony-engine-host", folder_.path("7/exe"));
