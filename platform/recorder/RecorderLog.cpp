@@ -7,7 +7,7 @@ namespace tarn::recorder {
 
 namespace {
 
-constexpr platform::LogCategory kCategory{"sys.oxbow.tarnkit", "tarnrec"};
+constexpr platform::LogCategory kCategory{"sys.oxbow.tarnkit", "tarnrs"};
 constexpr std::string_view kModule = "Recorder";
 
 }  // namespace
