@@ -132,6 +132,7 @@ class Host final : public platform::ProcessControl {
   }
 
   void exitProcess(int status) override {
+    loop_.flushAll();  // the replies to what came before
     end();
     std::_Exit(status);
   }

@@ -60,6 +60,8 @@ class MainLoop {
 
   // Calls handler->flush() once, before the loop waits for events.
   void flushLater(std::shared_ptr<EventHandler> handler) { flushes_.push_back(std::move(handler)); }
+  // Flushes at once what waits for the turn's end, for a turn that has none because the process ends in it.
+  void flushAll();
   void addTurnHook(TurnHook hook) { hooks_.push_back(std::move(hook)); }
 
   // Serves until stop(). Replies that are ready by then are flushed; work that waits then is left.
@@ -72,7 +74,6 @@ class MainLoop {
     std::uint32_t generation = 0;  // tells a watched descriptor from an earlier one of the same number
   };
 
-  void flushAll();
   void waitForEvents();
   void dispatch(std::uint64_t token, std::uint32_t events);
 

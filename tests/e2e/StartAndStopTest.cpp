@@ -8,6 +8,7 @@
 #include <algorithm>
 #include <cstring>
 
+#include "tests/e2e/RawSocket.h"
 #include "tests/e2e/ServiceFixture.h"
 
 namespace tarn::e2e {
@@ -50,6 +51,17 @@ TEST_F(StartAndStop, KillServiceCommitsEverythingAndExitsWith2) {
   EXPECT_EQ(service().wait(), 2);
   EXPECT_EQ(recordedMessages(), 300U);
   EXPECT_TRUE(events("*.Summary").empty());
+}
+
+TEST_F(StartAndStop, KillServiceSendsTheRepliesToWhatCameBefore) {
+  using namespace std::string_literals;
+  ASSERT_TRUE(startService());
+  RawSocket socket(this->socket());
+  // [1, 10] and [2, 11] in one write, so that one turn of the service serves both.
+  ASSERT_TRUE(socket.send(RawSocket::frame("\x82\x01\x0a"s) + RawSocket::frame("\x82\x02\x0b"s)));
+  EXPECT_EQ(socket.receiveFrame(), "\x83\x01\xf6\x80"s);  // [1, null, []]
+  EXPECT_TRUE(socket.isAtEnd());
+  EXPECT_EQ(service().wait(), 2);
 }
 
 TEST_F(StartAndStop, AKilledServiceKeepsWhatWasCommittedAndGoesOnBehindIt) {
