@@ -14,6 +14,7 @@
 #include "platform/ProcessControl.h"
 #include "platform/linux/ConnectionHost.h"
 #include "platform/linux/DescriptorLimit.h"
+#include "platform/linux/FileLock.h"
 #include "platform/linux/FileNotificationCenter.h"
 #include "platform/linux/HostConfiguration.h"
 #include "platform/linux/HostLog.h"
@@ -235,6 +236,10 @@ int serve(Setup& setup) {
   ListenSocket::Result socket = openSocket(setup.options);
   if (!socket.socket) {
     return refuse(socket.error, kExitFailure);
+  }
+  FileLock stateLock;
+  if (const std::string error = holdStateDirectory(setup.options.stateDirectory, stateLock); !error.empty()) {
+    return refuse(error, kExitFailure);
   }
   LinuxClock clock;
   OpenedLog log = openLog(setup.options.logTarget, setup.options.logLevel, clock);

@@ -110,4 +110,12 @@ std::string prepareStateDirectory(const std::string& path) {
   return error == 0 ? std::string() : "state directory " + path + errorSuffix(error);
 }
 
+std::string holdStateDirectory(const std::string& path, FileLock& lock, std::chrono::milliseconds patience) {
+  const int error = lock.take(path + "/.lock", patience);
+  if (error == ETIMEDOUT) {
+    return "another service uses the state directory " + path;
+  }
+  return error == 0 ? std::string() : "state directory " + path + errorSuffix(error);
+}
+
 }  // namespace tarn::linux_host

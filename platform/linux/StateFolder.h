@@ -1,8 +1,11 @@
 // The folders and files that keep the host's state. Threads: any. Nothing is thrown.
 #pragma once
 
+#include <chrono>
 #include <string>
 #include <string_view>
+
+#include "platform/linux/FileLock.h"
 
 namespace tarn::linux_host {
 
@@ -24,5 +27,10 @@ int replaceFile(const std::string& path, const std::string& temporary, std::stri
 
 // Makes the state directory (mode 0750) and checks that it can be used; empty, or what is wrong, with the path.
 std::string prepareStateDirectory(const std::string& path);
+
+// Keeps the state directory for one service until the lock's end: two recorders on one file would each take the other's
+// for damaged. One that is just ending is waited for. Empty, or what is wrong, with the path.
+std::string holdStateDirectory(const std::string& path, FileLock& lock,
+                               std::chrono::milliseconds patience = std::chrono::seconds(3));
 
 }  // namespace tarn::linux_host

@@ -95,6 +95,16 @@ TEST_F(StartAndStop, ASecondServiceOnALiveSocketIsRefused) {
   EXPECT_EQ(ctl({"status"}).status, 0);
 }
 
+TEST_F(StartAndStop, ASecondServiceOnAUsedStateDirectoryIsRefused) {
+  ASSERT_TRUE(startService());
+  const Finished second = runService({"--socket", directory_ / "other"});
+  EXPECT_EQ(second.status, 1);
+  EXPECT_NE(second.complaints.find("another service uses the state directory " + state()), std::string::npos)
+      << second.complaints;
+  EXPECT_NE(::access((directory_ / "other").c_str(), F_OK), 0);
+  EXPECT_EQ(ctl({"status"}).status, 0);
+}
+
 TEST_F(StartAndStop, AStaleSocketIsReplaced) {
   ASSERT_TRUE(startService());
   EXPECT_EQ(stopService(SIGKILL), 128 + SIGKILL);

@@ -118,6 +118,26 @@ TEST(StateFolder, StateDirectoryThatCannotBeMadeIsToldWithItsPathAndReason) {
   EXPECT_EQ(prepareStateDirectory("/proc/none"), "state directory /proc/none: No such file or directory");
 }
 
+TEST(StateFolder, StateDirectoryIsHeldByOneServiceAtATime) {
+  constexpr std::chrono::milliseconds kPatience{20};
+  const TemporaryFolder folder;
+  FileLock second;
+  {
+    FileLock first;
+    EXPECT_EQ(holdStateDirectory(folder.path(), first, kPatience), "");
+    EXPECT_EQ(holdStateDirectory(folder.path(), second, kPatience),
+              "another service uses the state directory " + folder.path());
+  }
+  EXPECT_EQ(holdStateDirectory(folder.path(), second, kPatience), "");
+}
+
+TEST(StateFolder, StateDirectoryThatCannotBeHeldIsToldWithItsPathAndReason) {
+  const TemporaryFolder folder;
+  FileLock lock;
+  EXPECT_EQ(holdStateDirectory(folder.path("none"), lock),
+            "state directory " + folder.path("none") + ": No such file or directory");
+}
+
 TEST(StateFolder, ReplacedFileLeavesNoTemporaryBehindEvenWhenItFails) {
   const TemporaryFolder folder;
   EXPECT_EQ(replaceFile(folder.path("f"), folder.path(".f.tmp"), "content"), 0);
