@@ -213,6 +213,9 @@ ListenSocket::Result openSocket(const ServiceOptions& options) {
     handedOver.error = "no socket: none was handed over, and neither --socket nor XDG_RUNTIME_DIR names one";
     return handedOver;
   }
+  if (options.socketIsDefault) {
+    makeFolder(options.socketPath->substr(0, options.socketPath->rfind('/')), 0755);  // binding tells when it failed
+  }
   return ListenSocket::bindTo(*options.socketPath);
 }
 

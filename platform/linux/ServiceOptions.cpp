@@ -105,6 +105,7 @@ ServiceCommand parseServiceCommand(int argumentCount, const char* const* argumen
     return refuse("--state-dir: must be given, neither XDG_STATE_HOME nor HOME names a folder");
   }
   options.socketPath = raw.socketPath.empty() ? defaultSocketPath(environment) : std::optional(raw.socketPath);
+  options.socketIsDefault = raw.socketPath.empty();
   options.stateDirectory = *stateDirectory;
   options.configurationFile = orNothing(raw.configurationFile);
   options.devicePropertiesFile = orNothing(raw.devicePropertiesFile);

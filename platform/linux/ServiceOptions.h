@@ -18,6 +18,7 @@ inline constexpr int kExitConfiguration = 78;  // a wrong configuration or devic
 
 struct ServiceOptions {
   std::optional<std::string> socketPath;  // nothing: none named and no default, so the listener must be handed over
+  bool socketIsDefault = false;           // then its folder is the service's own to make
   std::string stateDirectory;
   std::optional<std::string> configurationFile;
   std::optional<std::string> devicePropertiesFile;

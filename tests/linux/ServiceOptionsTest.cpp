@@ -43,6 +43,7 @@ TEST(ServiceOptions, DefaultsOfRootAreTheSystemsWhateverItsEnvironment) {
   const ServiceCommand command = parse({}, {true, "/run/user/0", "/srv/root/state", "/srv/root"});
   ASSERT_TRUE(command.options);
   EXPECT_EQ(command.options->socketPath, "/run/tarnreporting/socket");
+  EXPECT_TRUE(command.options->socketIsDefault);
   EXPECT_EQ(command.options->stateDirectory, "/var/lib/tarnreporting");
 }
 
@@ -60,6 +61,7 @@ TEST(ServiceOptions, EveryOptionIsTaken) {
                                         "--log-level", "debug", "--log-target", "journal"});
   ASSERT_TRUE(command.options);
   EXPECT_EQ(command.options->socketPath, "/s");
+  EXPECT_FALSE(command.options->socketIsDefault);
   EXPECT_EQ(command.options->stateDirectory, "/d");
   EXPECT_EQ(command.options->configurationFile, "c");
   EXPECT_EQ(command.options->devicePropertiesFile, "p");
