@@ -121,6 +121,11 @@ class Host final : public platform::ProcessControl {
               "reporting is disabled by the service's defaults");
       service_->setReportingEnabled(false);
     }
+    // Only now is there anything to connect to: who can reach the service finds it whole, its notifications heard.
+    if (const std::string error = socket.listen(); !error.empty()) {
+      recorder_.shutdown();
+      return refuse(error, kExitFailure);
+    }
     connections_.setStatusSource([this] { return status(); });
     listener_ = std::make_shared<SocketListener>(connections_, std::move(socket));
     listener_->setDelegate(service_);
@@ -203,7 +208,7 @@ class Host final : public platform::ProcessControl {
                                          .commandRunner = commandRunner_};
 };
 
-// The listening socket: the one handed over, else the one named.
+// The listening socket: the one handed over, else the right to the one named.
 ListenSocket::Result openSocket(const ServiceOptions& options) {
   ListenSocket::Result handedOver = ListenSocket::takeHandedOver();
   if (handedOver.socket || !handedOver.error.empty()) {
@@ -216,7 +221,7 @@ ListenSocket::Result openSocket(const ServiceOptions& options) {
   if (options.socketIsDefault) {
     makeFolder(options.socketPath->substr(0, options.socketPath->rfind('/')), 0755);  // binding tells when it failed
   }
-  return ListenSocket::bindTo(*options.socketPath);
+  return ListenSocket::claim(*options.socketPath);
 }
 
 int serve(Setup& setup) {

@@ -87,15 +87,6 @@ std::string clearStale(const std::string& path, const sockaddr_un& address) {
   return {};
 }
 
-bool bindWithMode(int descriptor, const sockaddr_un& address, mode_t mode) {
-  const mode_t before = ::umask(static_cast<mode_t>(~mode & 0777));
-  const int result = ::bind(descriptor, generic(address), sizeof address);
-  const int error = errno;
-  ::umask(before);
-  errno = error;
-  return result == 0;
-}
-
 }  // namespace
 
 ListenSocket::ListenSocket(ListenSocket&& other) noexcept {
@@ -151,7 +142,7 @@ ListenSocket::Result ListenSocket::takeHandedOver() {
   return result;
 }
 
-ListenSocket::Result ListenSocket::bindTo(const std::string& path, mode_t mode) {
+ListenSocket::Result ListenSocket::claim(const std::string& path) {
   Result result;
   sockaddr_un address;
   if (!fillAddress(path, address)) {
@@ -168,22 +159,41 @@ ListenSocket::Result ListenSocket::bindTo(const std::string& path, mode_t mode) 
   socket.name_ = path;
   socket.lock_ = std::move(lock);
   result.error = clearStale(path, address);
-  if (!result.error.empty()) {
-    return result;
+  if (result.error.empty()) {
+    result.socket = std::move(socket);
   }
-  socket.socket_ = makeSocket();
+  return result;
+}
+
+std::string ListenSocket::listen(mode_t mode) {
+  if (socket_) {
+    return {};
+  }
+  sockaddr_un address;
+  fillAddress(name_, address);
+  UniqueDescriptor made = makeSocket();
   struct stat file {};
-  if (!socket.socket_ || !bindWithMode(socket.socket_.get(), address, mode) || ::lstat(path.c_str(), &file) != 0) {
-    result.error = "can't listen on " + path + errorSuffix(errno);
-    return result;
+  // Until it listens nobody can connect, so nobody comes before the mode.
+  if (!made || ::bind(made.get(), generic(address), sizeof address) != 0 || ::lstat(name_.c_str(), &file) != 0) {
+    return "can't listen on " + name_ + errorSuffix(errno);
   }
-  socket.device_ = file.st_dev;
-  socket.inode_ = file.st_ino;
-  if (::listen(socket.socket_.get(), SOMAXCONN) != 0) {
-    result.error = "can't listen on " + path + errorSuffix(errno);
-    return result;
+  device_ = file.st_dev;
+  inode_ = file.st_ino;
+  if (::chmod(name_.c_str(), mode) != 0 || ::listen(made.get(), SOMAXCONN) != 0) {
+    return "can't listen on " + name_ + errorSuffix(errno);
   }
-  result.socket = std::move(socket);
+  socket_ = std::move(made);
+  return {};
+}
+
+ListenSocket::Result ListenSocket::bindTo(const std::string& path, mode_t mode) {
+  Result result = claim(path);
+  if (result.error.empty()) {
+    result.error = result.socket.listen(mode);
+  }
+  if (!result.error.empty()) {
+    result.socket = ListenSocket();
+  }
   return result;
 }
 

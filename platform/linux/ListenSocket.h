@@ -4,8 +4,7 @@
 // its own at the end, so two services that start at once never take each other's file away. A socket that somebody
 // listens on is never replaced, nor is a file that is no socket.
 //
-// Owned by the listener. Threads: one at a time; bindTo() sets the process's file mode mask for a moment, so it is
-// called before other threads make files.
+// Owned by the listener. Threads: one at a time.
 #pragma once
 
 #include <sys/types.h>
@@ -28,17 +27,23 @@ class ListenSocket {
   ListenSocket& operator=(ListenSocket&& other) noexcept;
   ListenSocket(const ListenSocket&) = delete;
   ListenSocket& operator=(const ListenSocket&) = delete;
-  // Closes it; a socket file that bindTo() made is removed when it is still the same one.
+  // Closes it; a socket file that listen() made is removed when it is still the same one.
   ~ListenSocket();
 
   // The socket that the service manager handed over (LISTEN_FDS), taken out of the environment. Neither socket nor
   // error when it handed over none; an error when it is more than one or not a listening Unix stream socket.
   static Result takeHandedOver();
-  // A socket that listens at this path, with this file mode before anybody can connect.
+  // The right to this path, which no other service gets from here on. Nothing is there to connect to before listen().
+  static Result claim(const std::string& path);
+  // Listens at the claimed path, with this file mode before anybody can connect; one that was handed over listens
+  // already. What went wrong, or nothing.
+  [[nodiscard]] std::string listen(mode_t mode = kDefaultMode);
+  // Both in one.
   static Result bindTo(const std::string& path, mode_t mode = kDefaultMode);
 
   int descriptor() const noexcept { return socket_.get(); }
-  explicit operator bool() const noexcept { return static_cast<bool>(socket_); }
+  // Whether there is one, claimed or listening.
+  explicit operator bool() const noexcept { return socket_ || lock_; }
   // "/run/x/socket", or "handed over".
   const std::string& name() const noexcept { return name_; }
 

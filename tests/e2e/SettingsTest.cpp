@@ -34,6 +34,16 @@ TEST_F(Settings, AChangeOfADefaultReachesTheRunningServiceWithItsNotification) {
   EXPECT_TRUE(waitForLog("Updating value featureName=device_name"));
 }
 
+TEST_F(Settings, WhoCanConnectFindsTheNotificationsHeard) {
+  // The recorder takes a while to open its file; a post of that time must not be missed.
+  for (int round = 0; round < 10; ++round) {
+    ASSERT_TRUE(startService({"--log-level", "debug"}));
+    ASSERT_EQ(ctl({"notify", "sys.oxbow.homeshell.ringerstate", "--state", "1"}).status, 0);
+    ASSERT_TRUE(waitForLog("Updating value featureName=ringerstate"));
+    ASSERT_EQ(stopService(SIGTERM), 0);
+  }
+}
+
 TEST_F(Settings, AStateWordReachesTheRunningService) {
   ASSERT_TRUE(startService({"--log-level", "debug"}));
   ASSERT_EQ(ctl({"notify", "sys.oxbow.homeshell.ringerstate", "--state", "1"}).status, 0);

@@ -58,6 +58,24 @@ TEST_F(ListenSocketTest, ListensAtAFreshPath) {
   EXPECT_EQ(result.socket.name(), path_);
 }
 
+TEST_F(ListenSocketTest, ClaimedPathHasNothingToConnectToBeforeItListens) {
+  auto claimed = ListenSocket::claim(path_);
+  EXPECT_EQ(claimed.error, "");
+  EXPECT_TRUE(claimed.socket);
+  EXPECT_FALSE(std::filesystem::exists(path_));
+  EXPECT_EQ(ListenSocket::claim(path_).error, "another service is listening on " + path_);
+  EXPECT_EQ(claimed.socket.listen(), "");
+  EXPECT_TRUE(canConnect(path_));
+}
+
+TEST_F(ListenSocketTest, ClaimedPathThatSomethingElseTookIsToldWhenItListens) {
+  auto claimed = ListenSocket::claim(path_);
+  std::ofstream(path_) << "something else";
+  EXPECT_EQ(claimed.socket.listen(), "can't listen on " + path_ + ": Address already in use");
+  claimed.socket = ListenSocket();
+  EXPECT_TRUE(std::filesystem::exists(path_));
+}
+
 TEST_F(ListenSocketTest, HasTheModeWhateverTheMaskAndLeavesTheMaskAlone) {
   const mode_t before = ::umask(0);
   const auto usual = ListenSocket::bindTo(path_);
