@@ -3,8 +3,8 @@
 #include <unistd.h>
 
 #include <cstdlib>
-#include <cstring>
 #include <string>
+#include <system_error>
 #include <vector>
 
 #include "bench/Message.h"
@@ -21,7 +21,7 @@ constexpr std::uint64_t kForEver = UINT64_MAX;
 
 void check(int result, const char* what) {
   if (result < 0) {
-    fail(std::string("sd-bus, ") + what + ": " + std::strerror(-result));
+    fail(std::string("sd-bus, ") + what + ": " + std::generic_category().message(-result));
   }
 }
 

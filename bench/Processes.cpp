@@ -10,12 +10,12 @@
 
 #include <cerrno>
 #include <cstdlib>
-#include <cstring>
 #include <ctime>
 #include <filesystem>
 #include <fstream>
 #include <iostream>
 #include <sstream>
+#include <system_error>
 
 namespace tarn::bench {
 
@@ -112,7 +112,7 @@ std::vector<double> measureInChild(const std::function<std::vector<double>()>& m
 
 TemporaryDirectory::TemporaryDirectory(const std::string& parent) : path_(parent + "/tarnbench-XXXXXX") {
   if (::mkdtemp(path_.data()) == nullptr) {
-    fail("can't make a directory in " + parent + ": " + std::strerror(errno));
+    fail("can't make a directory in " + parent + ": " + std::generic_category().message(errno));
   }
 }
 

@@ -58,7 +58,7 @@ std::shared_ptr<TarnReportingSession> TarnReportingSession::initWithID(std::int6
     Constructible(std::int64_t theID, std::vector<std::int32_t> identifiers, Mode theMode)
         : TarnReportingSession(theID, std::move(identifiers), theMode) {}
   };
-  const std::shared_ptr<TarnReportingSession> session =
+  std::shared_ptr<TarnReportingSession> session =
       std::make_shared<Constructible>(reporterID, std::move(processIdentifiers), mode);
   session->workers_.startWorkersFromClasses(workerClasses().startOnInitWorkerClasses, session);
   log(LogLevel::Info, "created reporting session for ID: %lli", reporterID);
