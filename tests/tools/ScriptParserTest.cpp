@@ -2,6 +2,8 @@
 
 #include <gtest/gtest.h>
 
+#include <filesystem>
+#include <fstream>
 #include <string>
 #include <variant>
 
@@ -224,6 +226,24 @@ TEST(ScriptParser, ShowsLongValuesShortened) {
   const std::string fault = faultOf(R"({"op":"reporterID","reporterID":")" + std::string(100000, 'x') + "\"}");
   EXPECT_LT(fault.size(), 200U);
   EXPECT_TRUE(contains(fault, "...")) << fault;
+}
+
+// The fuzzer's seeds and the examples, with every line cut short at every place as well.
+TEST(ScriptParser, TakesOrRefusesEveryBeginningOfTheSeeds) {
+  std::size_t taken = 0;
+  for (const auto& entry : std::filesystem::directory_iterator(TARN_SCRIPT_SEEDS)) {
+    std::ifstream file(entry.path());
+    for (std::string line; std::getline(file, line);) {
+      for (std::size_t length = 0; length <= line.size(); ++length) {
+        const auto result = parseLine(std::string_view(line).substr(0, length), 1);
+        const auto* fault = std::get_if<Fault>(&result);
+        ASSERT_TRUE(fault == nullptr || !fault->text.empty()) << entry.path() << ": " << line;
+        ASSERT_TRUE(fault != nullptr || length == line.size()) << "taken: " << line.substr(0, length);
+        taken += fault == nullptr ? 1U : 0U;
+      }
+    }
+  }
+  EXPECT_GT(taken, 40U);
 }
 
 TEST(ScriptParser, TellsBlankLinesFromOthers) {
