@@ -1,5 +1,5 @@
 // What becomes of a client's sessions when its connection ends, and of everybody else's.
-#include <signal.h>
+#include <csignal>
 
 #include "tests/e2e/ServiceFixture.h"
 

@@ -1,7 +1,7 @@
 // tarnreportingctl's contract with scripts: exit statuses, replies, complaints.
 #include <fcntl.h>
-#include <signal.h>
 #include <unistd.h>
+#include <csignal>
 
 #include <array>
 
@@ -127,10 +127,12 @@ TEST_F(Ctl, AScriptIsPlayedWhileItComes) {
   setup.inputFd = pipe[0];
   Process player(setup, directory_);
   ::close(pipe[0]);
-  const std::string first = "{\"op\":\"createReportingSession\",\"reporterID\":1}\n{\"op\":";
+  const std::string first = R"({"op":"createReportingSession","reporterID":1}
+{"op":)";
   ASSERT_EQ(::write(pipe[1], first.data(), first.size()), static_cast<ssize_t>(first.size()));
   EXPECT_TRUE(eventually([&] { return jsonLines(player.output()).size() == 1; }));
-  const std::string second = "\"getAllReporters\"}\n";
+  const std::string second = R"("getAllReporters"}
+)";
   ASSERT_EQ(::write(pipe[1], second.data(), second.size()), static_cast<ssize_t>(second.size()));
   ::close(pipe[1]);
   EXPECT_EQ(player.wait(), 0);
@@ -141,8 +143,8 @@ TEST_F(Ctl, ALongScriptIsPlayedToItsEnd) {
   ASSERT_TRUE(startService());
   std::string script = "{\"op\":\"createReportingSession\",\"reporterID\":1}\n";
   for (int index = 0; index < 3000; ++index) {
-    script += "{\"op\":\"sendMessage\",\"reporterIDs\":[1],\"category\":4,\"type\":1,\"message\":{\"n\":" +
-              std::to_string(index) + "}}\n";
+    script += R"({"op":"sendMessage","reporterIDs":[1],"category":4,"type":1,"message":{"n":)" + std::to_string(index) +
+              "}}\n";
   }
   EXPECT_EQ(play(script).size(), 3001U);
   EXPECT_EQ(eventsOnceThereAre(3000, "sys.oxbow.tarnkit.Playback.Start").size(), 3000U);

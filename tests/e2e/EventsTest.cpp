@@ -1,5 +1,5 @@
 // tarnreportingctl events: what the recorder holds, with and without a running service.
-#include <signal.h>
+#include <csignal>
 
 #include <algorithm>
 

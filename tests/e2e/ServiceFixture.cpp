@@ -1,6 +1,6 @@
 #include "tests/e2e/ServiceFixture.h"
 
-#include <signal.h>
+#include <csignal>
 
 #include "platform/recorder/EventReader.h"
 #include "plist/Json.h"
@@ -24,10 +24,12 @@ bool ServiceFixture::startService(const std::vector<std::string>& options) {
   std::vector<std::string> all = {"--socket", socket()};
   all.insert(all.end(), options.begin(), options.end());
   service_ = std::make_unique<Process>(serviceSetup(all), directory_);
-  const auto accepts = [this] {
-    return client::TarnReportingClient::connect(socket()).client != nullptr || !service_->isRunning();
+  // The socket takes connections before the service is set up; only an answer tells that it is.
+  const auto answers = [this] {
+    const auto connected = client::TarnReportingClient::connect(socket());
+    return !service_->isRunning() || (connected.client && connected.client->call(client::status(), kDeadline).ok());
   };
-  return eventually(accepts) && service_->isRunning();
+  return eventually(answers) && service_->isRunning();
 }
 
 Finished ServiceFixture::runService(const std::vector<std::string>& options) {

@@ -20,13 +20,14 @@ struct Event {
 };
 
 class ServiceFixture : public ::testing::Test {
- protected:
+ public:
   ~ServiceFixture() override;
 
+ protected:
   std::string socket() const { return directory_ / "socket"; }
   std::string state() const { return directory_ / "state"; }
 
-  // Starts the service with more options and waits until it accepts. Whether it does.
+  // Starts the service with more options and waits until it answers. Whether it does.
   bool startService(const std::vector<std::string>& options = {});
   // The same program without waiting; for starts that must fail.
   Finished runService(const std::vector<std::string>& options);

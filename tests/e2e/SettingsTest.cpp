@@ -1,5 +1,5 @@
 // Settings: the defaults store, the notifications and the device properties, as a running service sees them.
-#include <signal.h>
+#include <csignal>
 
 #include "tests/e2e/ServiceFixture.h"
 

@@ -1,9 +1,9 @@
 // How the service starts, whom it refuses, and what it leaves behind when it ends.
-#include <signal.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/un.h>
 #include <unistd.h>
+#include <csignal>
 
 #include <algorithm>
 #include <cstring>

@@ -1,6 +1,6 @@
 // What a client may send that no client library would: each wrong frame is answered or cut off as it must be, and
 // another client, which works all the while, never notices.
-#include <signal.h>
+#include <csignal>
 
 #include <span>
 

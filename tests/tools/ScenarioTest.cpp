@@ -27,6 +27,12 @@ constexpr const char* kScript = R"(
 )";
 
 class Scenario : public ::testing::Test {
+ public:
+  ~Scenario() override {
+    std::error_code ignored;
+    std::filesystem::remove_all(directory_, ignored);
+  }
+
  protected:
   Scenario() {
     std::string name = (std::filesystem::temp_directory_path() / "tarnscenario.XXXXXX").string();
@@ -35,11 +41,6 @@ class Scenario : public ::testing::Test {
     }
     expectations_.push_back(expectation(kScript));
   }
-  ~Scenario() override {
-    std::error_code ignored;
-    std::filesystem::remove_all(directory_, ignored);
-  }
-
   Expectation expectation(const std::string& script, bool alone = false) {
     const std::string path = directory_ + "/script.jsonl";
     std::ofstream(path) << script;

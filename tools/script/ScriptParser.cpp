@@ -20,16 +20,15 @@ using plist::Kind;
 using plist::ValueView;
 
 // The members that a line may have.
-enum Member : unsigned {
-  kReporterID = 1U << 0U,
-  kServiceType = 1U << 1U,
-  kConfiguration = 1U << 2U,
-  kMessage = 1U << 3U,
-  kCategory = 1U << 4U,
-  kType = 1U << 5U,
-  kReporterIDs = 1U << 6U,
-  kSeconds = 1U << 7U,
-};
+using Member = unsigned;
+constexpr Member kReporterID = 1U << 0U;
+constexpr Member kServiceType = 1U << 1U;
+constexpr Member kConfiguration = 1U << 2U;
+constexpr Member kMessage = 1U << 3U;
+constexpr Member kCategory = 1U << 4U;
+constexpr Member kType = 1U << 5U;
+constexpr Member kReporterIDs = 1U << 6U;
+constexpr Member kSeconds = 1U << 7U;
 
 struct MemberRow {
   std::string_view name;
@@ -150,7 +149,7 @@ bool LineReader::readOp() {
   }
   const auto operation = wire::operationFromName(step_.op);
   if (!operation || *operation == wire::Operation::Status) {
-    return failMember("op", op, "a remote operation, \"sleep\" or \"disconnect\"");
+    return failMember("op", op, R"(a remote operation, "sleep" or "disconnect")");
   }
   step_.request.operation = *operation;
   allowed_ = membersOf(*operation);
@@ -177,7 +176,7 @@ bool LineReader::checkMembers() {
     const auto* row = std::find_if(kMembers.begin(), kMembers.end(), [&](const auto& one) { return one.name == name; });
     const bool isKnown = row != kMembers.end() && has(row->member);
     if (!isKnown && name != "op" && name != "client") {
-      std::string expected = "only \"op\", \"client\"";
+      std::string expected = R"(only "op", "client")";
       for (const auto& one : kMembers) {
         expected += has(one.member) ? ", " + quoted(one.name) : "";
       }
