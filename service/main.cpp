@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <cstdlib>
 #include <iostream>
+#include <limits>
 #include <memory>
 #include <optional>
 #include <string>
@@ -133,6 +134,8 @@ class Host final : public platform::ProcessControl {
     serviceManager_.notifyReady();
     watchdog_.start();
     loop_.run();
+    loop_.queue()->run(std::numeric_limits<std::size_t>::max());  // requests that were taken are served
+    loop_.flushAll();
     end();
     return kExitSuccess;
   }

@@ -31,9 +31,10 @@ LinuxWorkQueues::~LinuxWorkQueues() {
   pool_->stop();
 }
 
-std::shared_ptr<platform::WorkQueue> LinuxWorkQueues::makeSerialQueue(std::string_view,
-                                                                      platform::QualityOfService quality) {
-  if (quality == platform::QualityOfService::UserInteractive) {
+std::shared_ptr<platform::WorkQueue> LinuxWorkQueues::makeSerialQueue(std::string_view name,
+                                                                      platform::QualityOfService) {
+  // By name alone: a worker's own queue must never be the one that the worker blocks.
+  if (name == kServerQueueName) {
     return serverQueue_;
   }
   pool_->start(kThreads);

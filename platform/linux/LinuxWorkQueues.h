@@ -1,4 +1,4 @@
-// LinuxWorkQueues: makes the serial queues of the process. The user-interactive queue is the main loop's own; all
+// LinuxWorkQueues: makes the serial queues of the process. The reporting server queue is the main loop's own; all
 // others share a small pool of threads.
 //
 // Owned by the entry point; the queues that it made may outlive it, but then run nothing more. Threads: any.
@@ -16,6 +16,7 @@ class LinuxWorkQueues final : public platform::WorkQueues {
  public:
   // Enough for the few queues that block now and then (a back-end's, two tools at once) not to hold up the others.
   static constexpr std::size_t kThreads = 4;
+  static constexpr std::string_view kServerQueueName = "sys.oxbow.tarnkit.reporting.server";
 
   LinuxWorkQueues(const platform::Clock& clock, std::shared_ptr<platform::WorkQueue> serverQueue);
   LinuxWorkQueues(const LinuxWorkQueues&) = delete;

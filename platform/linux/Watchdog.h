@@ -15,8 +15,8 @@
 
 namespace tarn::linux_host {
 
-// The longest that work may block the queue on purpose.
-inline constexpr std::chrono::nanoseconds kLongestDeliberateWait = std::chrono::seconds(180);
+// The longest that work may block the queue on purpose, and what its end may take to be seen.
+inline constexpr std::chrono::nanoseconds kLongestDeliberateWait = std::chrono::seconds(180 + 5);
 
 // Whether the queue is alive: it did something since the sample before, has nothing to do, or waits on purpose and not
 // yet too long.

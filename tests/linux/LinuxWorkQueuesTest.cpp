@@ -30,8 +30,10 @@ class LinuxWorkQueuesTest : public ::testing::Test {
   LinuxWorkQueues queues_{running_.clock, running_.loop.queue()};
 };
 
-TEST_F(LinuxWorkQueuesTest, TheUserInteractiveQueueIsTheMainLoops) {
-  EXPECT_EQ(queues_.makeSerialQueue("server", QualityOfService::UserInteractive), running_.loop.queue());
+TEST_F(LinuxWorkQueuesTest, TheServerQueueIsTheMainLoopsAndNoOtherIs) {
+  EXPECT_EQ(queues_.makeSerialQueue("sys.oxbow.tarnkit.reporting.server", QualityOfService::UserInteractive),
+            running_.loop.queue());
+  EXPECT_NE(queues_.makeSerialQueue("a worker's", QualityOfService::UserInteractive), running_.loop.queue());
 }
 
 TEST_F(LinuxWorkQueuesTest, OtherQueuesAreQueuesOfTheirOwn) {

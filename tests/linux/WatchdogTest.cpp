@@ -51,9 +51,10 @@ INSTANTIATE_TEST_SUITE_P(Table, WatchdogDecision,
                                            AliveCase{"Hung", 7, 7, false, std::nullopt, false},
                                            AliveCase{"Idle", 7, 7, true, std::nullopt, true},
                                            AliveCase{"WaitJustBegun", 7, 7, false, 0ns, true},
-                                           AliveCase{"WaitJustBelowTheLongest", 7, 7, false, 180s - 1ns, true},
-                                           AliveCase{"WaitOfTheLongest", 7, 7, false, 180s, false},
-                                           AliveCase{"WaitBeyondTheLongest", 7, 7, false, 180s + 1ns, false},
+                                           AliveCase{"WaitOfThreeMinutes", 7, 7, false, 180s, true},
+                                           AliveCase{"WaitJustBelowTheLongest", 7, 7, false, 185s - 1ns, true},
+                                           AliveCase{"WaitOfTheLongest", 7, 7, false, 185s, false},
+                                           AliveCase{"WaitBeyondTheLongest", 7, 7, false, 185s + 1ns, false},
                                            AliveCase{"LongWaitButProgress", 7, 8, false, 200s, true}),
                          [](const auto& row) { return std::string(row.param.name); });
 
@@ -87,7 +88,7 @@ TEST_F(WatchdogTest, PingsThroughADeliberateWaitUpToItsLongest) {
   progress_.step();
   watchdog_.check();
   progress_.beginWait(clock_.monotonic());
-  clock_.advance(179s);
+  clock_.advance(184s);
   EXPECT_TRUE(watchdog_.check());
   clock_.advance(1s);
   EXPECT_FALSE(watchdog_.check());
