@@ -4,6 +4,20 @@
 
 namespace tarn {
 
+namespace {
+
+template <class Values>
+plist::Dictionary dictionaryOf(const Values& values) {
+  std::vector<plist::Dictionary::Entry> entries;
+  entries.reserve(values.size());
+  for (const auto& [key, value] : values) {
+    entries.push_back({key, plist::ValueView(value)});
+  }
+  return plist::Dictionary::fromEntries(entries);
+}
+
+}  // namespace
+
 void TarnReportingSessionPreviousValues::merge(const plist::Dictionary& payload) {
   if (payload.empty()) {
     return;
@@ -25,7 +39,14 @@ void TarnReportingSessionPreviousValues::merge(const plist::Dictionary& payload)
 }
 
 void TarnReportingSessionPreviousValues::merge(const TarnReportingSessionPreviousValues& other) {
-  merge(other.dictionary());
+  if (recent_.empty() && older_.empty()) {
+    *this = other;
+    return;
+  }
+  merge(dictionaryOf(other.older_));
+  for (const plist::Dictionary& payload : other.recent_) {
+    merge(payload);
+  }
 }
 
 plist::ValueView TarnReportingSessionPreviousValues::get(const plist::Key& key) const noexcept {
@@ -38,17 +59,18 @@ plist::ValueView TarnReportingSessionPreviousValues::get(const plist::Key& key) 
   return found == older_.end() ? plist::ValueView() : found->second.view();
 }
 
+// In one pass: merging shape by shape would walk all that was gathered so far once for each.
 plist::Dictionary TarnReportingSessionPreviousValues::dictionary() const {
-  std::vector<plist::Dictionary::Entry> entries;
-  entries.reserve(older_.size());
+  std::unordered_map<plist::Key, plist::ValueView> latest;
+  for (auto payload = recent_.rbegin(); payload != recent_.rend(); ++payload) {
+    for (const plist::Dictionary::Entry& entry : *payload) {
+      latest.emplace(entry.key, entry.value);
+    }
+  }
   for (const auto& [key, value] : older_) {
-    entries.push_back({key, value.view()});
+    latest.emplace(key, value.view());
   }
-  plist::Dictionary all = plist::Dictionary::fromEntries(entries);
-  for (const plist::Dictionary& payload : recent_) {
-    all.merge(payload);
-  }
-  return all;
+  return dictionaryOf(latest);
 }
 
 }  // namespace tarn

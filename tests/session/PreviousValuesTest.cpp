@@ -27,6 +27,22 @@ TEST(TarnReportingSessionPreviousValues, MergeOfAnotherSessionsValues) {
   EXPECT_EQ(values.dictionary(), (plist::Dictionary{{"a", 1}, {"b", 2}}));
 }
 
+TEST(TarnReportingSessionPreviousValues, AnotherSessionsValuesWinOverOwnOnes) {
+  TarnReportingSessionPreviousValues other;
+  plist::Dictionary model{{"own", 1}, {"key0", "own"}, {"key29", "own"}};
+  TarnReportingSessionPreviousValues values;
+  values.merge(model);
+  for (int i = 0; i < 30; ++i) {  // more shapes than are kept whole
+    const plist::Dictionary payload{{"key" + std::to_string(i), i}, {"last", i}};
+    other.merge(payload);
+    model.merge(payload);
+  }
+  values.merge(other);
+  EXPECT_EQ(values.dictionary(), model);
+  EXPECT_EQ(values.get("key0").asInt64(), 0);
+  EXPECT_EQ(values.get("last").asInt64(), 29);
+}
+
 TEST(TarnReportingSessionPreviousValues, ManyShapesMergeAsOneByOne) {
   const unsigned seed = std::random_device{}();
   SCOPED_TRACE("seed " + std::to_string(seed));
