@@ -14,6 +14,9 @@ namespace {
 constexpr std::size_t kModuleWidth = 25;
 constexpr std::size_t kLineWidth = 5;
 constexpr std::string_view kSubsystem = "sys.oxbow.tarnkit";
+// Texts hold what clients send. One that is longer is cut and tells so, or a client could have megabytes written with
+// each of its requests.
+constexpr std::size_t kMaxLineBytes = 65536;
 
 void appendPrefix(std::string& out, std::string_view module, int line) {
   if (module.size() < kModuleWidth) {
@@ -96,6 +99,18 @@ void appendFormatted(std::string& out, std::string_view format, std::initializer
   }
 }
 
+void shorten(std::string& line) {
+  if (line.size() <= kMaxLineBytes) {
+    return;
+  }
+  std::size_t end = kMaxLineBytes;
+  while ((static_cast<unsigned char>(line[end]) & 0xC0U) == 0x80U) {  // not inside a character
+    --end;
+  }
+  const std::string rest = " ... (" + std::to_string(line.size() - end) + " more bytes)";
+  line.replace(end, std::string::npos, rest);
+}
+
 }  // namespace
 
 namespace detail {
@@ -111,6 +126,7 @@ void logWrite(const platform::LogCategory& category, LogLevel level, std::string
     appendPrefix(line, module, text.line);
   }
   appendFormatted(line, text.text, arguments);
+  shorten(line);
   TarnReportingFacilities().log.write({category, level, module, text.line, line});
 }
 

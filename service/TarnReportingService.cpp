@@ -28,10 +28,17 @@ void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
   TarnReportingLog(TarnReportingServiceDelegateCategory(), level, kModule, text, arguments...);
 }
 
+// Every start, stop and message without IDs logs these lists. So that a client with thousands of running sessions can't
+// slow down the others or fill the disk with them, a long one ends in the count of those that it leaves out.
 plist::Array descriptions(const TarnReportingServiceDelegateProtocol::Sessions& sessions) {
+  constexpr std::size_t kMostListed = 32;
+  const std::size_t listed = sessions.size() <= kMostListed ? sessions.size() : kMostListed - 1;
   plist::Array texts;
-  for (const auto& session : sessions) {
-    texts.append(session->description());
+  for (std::size_t i = 0; i < listed; ++i) {
+    texts.append(sessions[i]->description());
+  }
+  if (listed < sessions.size()) {
+    texts.append("and " + std::to_string(sessions.size() - listed) + " more");
   }
   return texts;
 }

@@ -51,6 +51,17 @@ TEST_F(TarnReportingLogTest, EntryCarriesCategoryLevelModuleAndTheLineOfTheState
   EXPECT_EQ(entry.line, before + 1);
 }
 
+TEST_F(TarnReportingLogTest, LongLinesAreCutBetweenCharactersAndTellHowMuchIsMissing) {
+  const std::size_t limit = 65536;
+  TarnReportingLogPlain(TarnReportingSessionCategory(), LogLevel::Default, "%@", std::string(limit, 'x'));
+  EXPECT_EQ(platform_.log.texts().back(), std::string(limit, 'x'));
+  TarnReportingLogPlain(TarnReportingSessionCategory(), LogLevel::Default, "%@", std::string(limit + 1, 'x'));
+  EXPECT_EQ(platform_.log.texts().back(), std::string(limit, 'x') + " ... (1 more bytes)");
+  const std::string accent = "\xC3\xA9";
+  TarnReportingLogPlain(TarnReportingSessionCategory(), LogLevel::Default, "%@", std::string(limit - 1, 'x') + accent);
+  EXPECT_EQ(platform_.log.texts().back(), std::string(limit - 1, 'x') + " ... (2 more bytes)");
+}
+
 TEST_F(TarnReportingLogTest, PlainLinesCarryNoPrefix) {
   TarnReportingLogPlain(TarnReportingSessionCategory(), LogLevel::Default, "count=%lu", std::size_t{3});
   const auto entry = platform_.log.entries().front();

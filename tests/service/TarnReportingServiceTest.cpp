@@ -174,6 +174,23 @@ TEST_F(TarnReportingServiceTest, LogsTheActiveSessionsOfEachClient) {
   EXPECT_TRUE(platform_.log.contains(LogLevel::Default, "1 active reporting session(s) (reporterID=10,"));
 }
 
+TEST_F(TarnReportingServiceTest, ListsOfManyActiveSessionsEndInACount) {
+  const Client client = connect(41);
+  std::vector<Answer<bool>> held(33);
+  for (std::int64_t id = 100; id < 132; ++id) {
+    create(client, id);
+    start(client, id, held[static_cast<std::size_t>(id - 100)]);
+  }
+  EXPECT_TRUE(platform_.log.contains(LogLevel::Default, "reporterID=131,"));
+  platform_.log.clear();
+  create(client, 132);
+  start(client, 132, held[32]);
+  EXPECT_TRUE(platform_.log.contains(LogLevel::Default, "33 active reporting session(s) (reporterID=100,"));
+  EXPECT_TRUE(platform_.log.contains(LogLevel::Default, "singleMessageSession=0, and 2 more)"));
+  EXPECT_FALSE(platform_.log.contains(LogLevel::Default, "reporterID=131,"));
+  EXPECT_EQ(service_->getAllActiveReportingSessions().size(), 33U);
+}
+
 TEST_F(TarnReportingServiceTest, InvalidationReportsTheUptimeOfTheClient) {
   const Client client = connect(41);
   platform_.advance(12s + 900ms);
