@@ -77,6 +77,13 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
     return std::move(reading_);
   }
 
+  // The parser takes a NUL between values for the end and would pass over what stands behind it.
+  void refuseNul() {
+    if (const std::size_t nul = text_.find('\0'); nul != std::string_view::npos && !reading_.fault) {
+      failAt(nul + 1, "a NUL is not allowed here");
+    }
+  }
+
   bool null() override { return fail("null is not allowed here"); }
   bool boolean(bool value) override { return add(value); }
   bool number_integer(std::int64_t value) override { return add(value); }
@@ -209,6 +216,7 @@ JsonReading readJson(std::string_view text, std::size_t maximumNesting) {
   const CountingIterator begin(text.data(), builder.readCount());
   const CountingIterator end(text.data() + text.size(), builder.readCount());
   nlohmann::json::sax_parse(begin, end, &builder);
+  builder.refuseNul();
   return builder.take();
 }
 

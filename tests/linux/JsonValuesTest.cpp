@@ -76,6 +76,12 @@ TEST(JsonValues, SyntaxErrorNamesLineColumnAndReason) {
             "3:1: syntax error while parsing object key - unexpected '}'; expected string literal");
 }
 
+TEST(JsonValues, NulBehindTheValueIsAFault) {
+  using namespace std::string_view_literals;
+  EXPECT_EQ(faultOf("{\"a\": 1}\0 and more"sv), "1:9: a NUL is not allowed here");
+  EXPECT_EQ(faultOf("{}\n\0"sv), "2:1: a NUL is not allowed here");
+}
+
 TEST(JsonValues, EmptyTextAndEarlyEndAreFaults) {
   EXPECT_NE(faultOf("").find("unexpected end of input"), std::string::npos);
   EXPECT_NE(faultOf("{\"a\": [1,").find("unexpected end of input"), std::string::npos);
