@@ -1,15 +1,24 @@
 #include "platform/linux/LineLog.h"
 
 #include <poll.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
+#include <climits>
 #include <exception>
 
 #include "platform/linux/HostLog.h"
 #include "platform/linux/LogLine.h"
 
 namespace tarn::linux_host {
+
+namespace {
+
+constexpr int kPatienceMilliseconds = 1000;
+
+}  // namespace
 
 LineLog::LineLog(const platform::Clock& clock, platform::LogLevel threshold) : clock_(clock) {
   setThreshold(threshold);
@@ -61,21 +70,41 @@ int LineLog::writeWhole(std::string_view line) {
     line = mended;
   }
   std::string_view left = line;
+  const auto failed = [&](int error) {
+    torn_ = torn_ ? left.size() + 1 != line.size() : left.size() != line.size();
+    return error;
+  };
   while (!left.empty()) {
-    const ssize_t written = ::write(target, left.data(), left.size());
+    if (mayStall_ && !waitForRoom(target)) {
+      return failed(EAGAIN);
+    }
+    // A pipe with any room takes this much, and no more than this in one piece.
+    const ssize_t written =
+        ::write(target, left.data(), mayStall_ ? std::min<std::size_t>(left.size(), PIPE_BUF) : left.size());
     if (written >= 0) {
       left.remove_prefix(static_cast<std::size_t>(written));
     } else if (errno == EAGAIN) {
-      pollfd waiting{target, POLLOUT, 0};
-      ::poll(&waiting, 1, -1);
+      if (!waitForRoom(target)) {
+        return failed(EAGAIN);
+      }
     } else if (errno != EINTR) {
-      const int error = errno;
-      torn_ = torn_ ? left.size() + 1 != line.size() : left.size() != line.size();
-      return error;
+      return failed(errno);
     }
   }
   torn_ = false;
   return 0;
+}
+
+// Whether there is room, for which only the first line in a row is waited for.
+bool LineLog::waitForRoom(int target) const {
+  pollfd waiting{target, POLLOUT, 0};
+  return ::poll(&waiting, 1, lost_ == 0 ? kPatienceMilliseconds : 0) != 0;
+}
+
+StreamLog::StreamLog(int descriptor, const platform::Clock& clock, platform::LogLevel threshold)
+    : LineLog(clock, threshold), descriptor_(descriptor) {
+  struct stat facts {};
+  setMayStall(::fstat(descriptor, &facts) == 0 && !S_ISREG(facts.st_mode));
 }
 
 }  // namespace tarn::linux_host

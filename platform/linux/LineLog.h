@@ -2,7 +2,8 @@
 //
 // Each entry is one write, so that entries of several threads, and of several processes that append to one file, stay
 // whole. A line that can't be written (a full disk, a closed pipe) is counted as lost; the first line that can be
-// written again is led by one that says how many were lost and why. A descriptor that blocks slows its writers down.
+// written again is led by one that says how many were lost and why. A pipe that nobody empties slows its writers down,
+// and after a second is taken for broken until it has room again: a stuck reader of the log must not stop the service.
 // Threads: any.
 #pragma once
 
@@ -30,12 +31,16 @@ class LineLog : public platform::Log {
 
   // Where the next line goes, or a negative errno value. Called with the sink locked.
   virtual int descriptor() = 0;
+  // For a descriptor other than a file's: it may be full for as long as its reader likes.
+  void setMayStall(bool mayStall) noexcept { mayStall_ = mayStall; }
 
  private:
   int writeWhole(std::string_view line);
   int writeLost();
+  bool waitForRoom(int target) const;
 
   const platform::Clock& clock_;
+  bool mayStall_ = false;  // constant after construction
   mutable std::mutex mutex_;
   std::uint64_t lost_ = 0;  // guarded by mutex_, as are all below
   int lostError_ = 0;
@@ -45,8 +50,7 @@ class LineLog : public platform::Log {
 // The standard error stream, or another descriptor that is open already. It isn't closed.
 class StreamLog final : public LineLog {
  public:
-  StreamLog(int descriptor, const platform::Clock& clock, platform::LogLevel threshold)
-      : LineLog(clock, threshold), descriptor_(descriptor) {}
+  StreamLog(int descriptor, const platform::Clock& clock, platform::LogLevel threshold);
 
  private:
   int descriptor() override { return descriptor_; }

@@ -88,6 +88,31 @@ TEST_F(LogSinks, StreamThatIsFullOfBytesSlowsItsWriterDownAndLosesNothing) {
   EXPECT_EQ(log.lostLines(), 0U);
 }
 
+TEST_F(LogSinks, StreamThatNobodyReadsHoldsItsWriterUpOnlyOnceAndTellsWhatItLost) {
+  int ends[2];
+  ASSERT_EQ(::pipe2(ends, 0), 0);  // the writing end blocks, as a standard error stream does
+  const UniqueDescriptor reading(ends[0]);
+  const UniqueDescriptor writing(ends[1]);
+  StreamLog log(writing.get(), clock_, LogLevel::Default);
+  const std::string text(10'000, 'x');
+  const auto begin = std::chrono::steady_clock::now();
+  for (int count = 0; count < 100; ++count) {
+    log.write(entry(text));
+  }
+  EXPECT_LT(std::chrono::steady_clock::now() - begin, std::chrono::seconds(10));
+  const std::uint64_t lost = log.lostLines();
+  EXPECT_GT(lost, 90U);
+
+  std::string seen;
+  std::vector<char> buffer(std::size_t{1} << 20);
+  seen.append(buffer.data(), static_cast<std::size_t>(::read(reading.get(), buffer.data(), buffer.size())));
+  log.write(entry("again"));
+  seen.append(buffer.data(), static_cast<std::size_t>(::read(reading.get(), buffer.data(), buffer.size())));
+  EXPECT_NE(seen.find(std::to_string(lost) + " log lines were lost"), std::string::npos);
+  EXPECT_TRUE(seen.ends_with("\n" + line("again")));
+  EXPECT_EQ(log.lostLines(), 0U);
+}
+
 TEST_F(LogSinks, EntriesOfSeveralThreadsStayWhole) {
   FileLog log(folder_.path("log"), clock_, LogLevel::Default);
   ASSERT_EQ(log.open(), 0);
