@@ -83,30 +83,37 @@ bool isIgnored(const Key& key, std::span<const Key> ignored) noexcept {
   return std::find(ignored.begin(), ignored.end(), key) != ignored.end();
 }
 
-// Two dictionaries of one key list: runs of equal bytes are passed over eight at a time, and only the values that hold
-// a difference are looked at.
+// Two dictionaries of one key list: ignored values are passed over unseen, equal bytes many at a time, and only the
+// values that hold a difference are looked at.
 bool equalWithSameKeys(const Body& a, const Body& b, std::span<const Key> ignored) noexcept {
-  const Key* const keys = a.keys->keys();
-  std::size_t index = 0;
+  const Key* key = a.keys->keys();
   const std::byte* atA = a.data();
   const std::byte* atB = b.data();
   while (atA != a.end()) {
+    if (isIgnored(*key, ignored)) {
+      atA += Packed::sizeAt(atA);
+      atB += Packed::sizeAt(atB);
+      ++key;
+      continue;
+    }
     const auto left = static_cast<std::size_t>(std::min(a.end() - atA, b.end() - atB));
-    const std::byte* const differing = atA + firstDifference(atA, atB, left);
-    if (differing == a.end()) {
+    if (a.end() - atA == b.end() - atB && std::memcmp(atA, atB, left) == 0) {
       return true;
     }
-    for (std::size_t size = Packed::sizeAt(atA); atA + size <= differing; size = Packed::sizeAt(atA)) {
+    // Values that are equal byte for byte end together, so the difference lies before either end.
+    const std::byte* const differing = atA + firstDifference(atA, atB, left);
+    std::size_t size = Packed::sizeAt(atA);
+    for (; atA + size <= differing; size = Packed::sizeAt(atA)) {
       atA += size;
       atB += size;
-      ++index;
+      ++key;
     }
-    if (!isIgnored(keys[index], ignored) && !(Packed::read(atA) == Packed::read(atB))) {
+    if (!isIgnored(*key, ignored) && !(Packed::read(atA) == Packed::read(atB))) {
       return false;
     }
-    atA += Packed::sizeAt(atA);
+    atA += size;
     atB += Packed::sizeAt(atB);
-    ++index;
+    ++key;
   }
   return true;
 }
