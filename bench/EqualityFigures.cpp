@@ -19,14 +19,6 @@ constexpr double kTarget = 30;
 const std::array<plist::Key, 3> kIgnored{plist::Key("processuptime_ms"), plist::Key("systemuptime_sec"),
                                          plist::Key("tarnreporting_timestamp")};
 
-// As the log holds them: with what the session adds.
-plist::Dictionary loggedMessage(std::uint64_t content, std::uint64_t moment) {
-  plist::Dictionary message = makeMessage(content, moment);
-  message.set("audiotag", "PlaybackStart");
-  message.set("HostApplicationDisplayID", "sys.oxbow.music");
-  return message;
-}
-
 bool isIgnored(const std::string& key) {
   return std::any_of(kIgnored.begin(), kIgnored.end(), [&](const plist::Key& other) { return other.text() == key; });
 }
@@ -51,12 +43,12 @@ double ofMaps(std::size_t count, const std::vector<VariantMap>& messages, const 
 }
 
 void measureCase(const Settings& settings, Table& table, const std::string& name, std::uint64_t content) {
-  const plist::Dictionary earlier = loggedMessage(1, 0);
+  const plist::Dictionary earlier = makeLoggedMessage(1, 0);
   const VariantMap earlierMap = variantMapOf(earlier);
   std::vector<plist::Dictionary> messages;
   std::vector<VariantMap> maps;
   for (std::uint64_t moment = 1; moment <= kMoments; ++moment) {
-    messages.push_back(loggedMessage(content, moment));
+    messages.push_back(makeLoggedMessage(content, moment));
     maps.push_back(variantMapOf(messages.back()));
   }
   const std::size_t count = settings.count(kComparisons);

@@ -12,6 +12,8 @@ namespace tarn::bench {
 
 // Of the steady clock.
 double nowSeconds();
+// Processor time of this process so far.
+double ownProcessorSeconds();
 
 using Samples = std::vector<double>;
 // Of at least one sample.
@@ -19,14 +21,15 @@ double median(Samples samples);
 // The sample that so large a part (0 to 1) of them doesn't exceed.
 double percentile(Samples samples, double part);
 
-// Nanoseconds that one call takes, on average over `count` of them.
+// Nanoseconds of processor time that one call takes, on average over `count` of them; what else runs on the machine
+// counts little.
 template <class Call>
 double nanosecondsEach(std::size_t count, Call&& call) {
-  const double start = nowSeconds();
+  const double start = ownProcessorSeconds();
   for (std::size_t i = 0; i < count; ++i) {
     call(i);
   }
-  return (nowSeconds() - start) * 1e9 / static_cast<double>(count);
+  return (ownProcessorSeconds() - start) * 1e9 / static_cast<double>(count);
 }
 
 // Keeps the compiler from leaving out what made the value.

@@ -51,6 +51,13 @@ plist::Dictionary makeMessage(std::uint64_t content, std::uint64_t moment) {
           {"session_token", "9f2c1d7e"}};
 }
 
+plist::Dictionary makeLoggedMessage(std::uint64_t content, std::uint64_t moment) {
+  plist::Dictionary message = makeMessage(content, moment);
+  message.set("audiotag", "PlaybackStart");
+  message.set("HostApplicationDisplayID", "sys.oxbow.music");
+  return message;
+}
+
 wire::Request makeRequest() {
   wire::Request request;
   request.operation = wire::Operation::SendMessage;

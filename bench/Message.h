@@ -22,6 +22,9 @@ inline plist::Dictionary makeMessage(std::uint64_t number) {
   return makeMessage(number, number);
 }
 
+// The message as a session logs it and hands it on: with the tag and the application that it adds.
+plist::Dictionary makeLoggedMessage(std::uint64_t content, std::uint64_t moment);
+
 // A sendMessage request to the one reporter. Its message is number 0.
 wire::Request makeRequest();
 // Turns the request's message into that of this number, in place.

@@ -11,6 +11,7 @@
 #include <thread>
 #include <vector>
 
+#include "bench/Message.h"
 #include "platform/Clock.h"
 #include "platform/Log.h"
 #include "platform/recorder/Recorder.h"
@@ -52,19 +53,8 @@ class Directory {
   std::filesystem::path path_;
 };
 
-Dictionary makeMessage(int n) {
-  return {{"tarnreporting_timestamp", 1763632800.25 + n},
-          {"audiotag", "audio"},
-          {"HostApplicationDisplayID", "sys.oxbow.Music"},
-          {"volume", 0.4375},
-          {"route", "Speaker"},
-          {"sample_rate", 48000},
-          {"buffer_frames", 512},
-          {"is_playing", true},
-          {"overloads", n % 7},
-          {"device_uid", "BuiltInSpeakerDevice"},
-          {"session_id", 1234567890123 + n},
-          {"reason", "newDeviceAvailable"}};
+Dictionary makeMessage(std::uint64_t number) {
+  return tarn::bench::makeLoggedMessage(number, number);
 }
 
 double processorSeconds() {
@@ -89,7 +79,7 @@ void recordMessages(Recorder& recorder, const std::vector<Dictionary>& messages)
 std::vector<Dictionary> makeMessages(int count) {
   std::vector<Dictionary> messages;
   messages.reserve(static_cast<std::size_t>(count));
-  for (int n = 0; n < count; ++n) messages.push_back(makeMessage(n));
+  for (int n = 0; n < count; ++n) messages.push_back(makeMessage(static_cast<std::uint64_t>(n)));
   return messages;
 }
 

@@ -22,10 +22,7 @@ SqliteAlone::SqliteAlone(const std::string& directory) : directory_(directory) {
   sqlite3_prepare_v2(database_, "INSERT INTO events VALUES(NULL, 1763632800.5, 'tally', ?1, ?2, '{}')", -1, &insert_,
                      nullptr);
   for (std::size_t i = 0; i < kPayloads; ++i) {
-    plist::Dictionary message = makeMessage(i);
-    message.set("audiotag", "PlaybackStart");
-    message.set("HostApplicationDisplayID", "sys.oxbow.music");
-    plist::appendJson(payloads_.emplace_back(), message);
+    plist::appendJson(payloads_.emplace_back(), makeLoggedMessage(i, i));
   }
 }
 

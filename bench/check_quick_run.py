@@ -1,0 +1,66 @@
+#!/usr/bin/env python3
+"""Whether a quick run of the benchmark prints the whole table: every row, with its figure and what stands beside it.
+
+usage: check_quick_run.py PROGRAM
+No time is looked at: a loaded machine is no defect.
+"""
+
+import re
+import subprocess
+import sys
+
+# A row's figure, and the peers that it stands beside ("" for none).
+ROWS = [
+    ("round trip, one processor, median", ("bare", "sd-bus")),
+    ("round trip, one processor, p99", ("bare", "sd-bus")),
+    ("round trip, placed freely, median", ("bare", "sd-bus")),
+    ("round trip, placed freely, p99", ("bare",)),
+    ("64 outstanding, a write each", ("bare", "sd-bus")),
+    ("processor time a message, nothing wanted", ("bare", "sd-bus")),
+    ("64 outstanding, writes gathered", ("bare",)),
+    ("64 outstanding, writes gathered, processor time a message", ("bare",)),
+    ("16384 outstanding, writes gathered", ("bare",)),
+    ("16384 outstanding, writes gathered, processor time a message", ("bare",)),
+    ("both events recorded, until committed", ("SQLite alone",)),
+    ("both events recorded, old ones expiring (32 MB)", ("SQLite alone",)),
+    ("processor time a message, both events recorded", ("",)),
+    ("processor time a message, old ones expiring", ("",)),
+    ("decoding a message, to views", ("bare walk",)),
+    ("decoding a request, to a finished dictionary", ("bare walk", "nlohmann")),
+    ("resident bytes a logged message", ("map of variants", "its CBOR")),
+    ("equality of two messages, equal but for the time", ("map of variants",)),
+    ("equality of two messages, unequal", ("map of variants",)),
+    ("intake with 10^3 messages logged", ("",)),
+    ("intake with 10^4 messages logged", ("with 10^3",)),
+]
+FIGURE = re.compile(r"^\d+(\.\d+)? (us|ns|B|k/s)$")
+PEER = re.compile(r"^(?P<name>.+?) \d+(\.\d+)? (us|ns|B|k/s)( \(.*\))?$")
+
+
+def rows_of(output):
+    lines = [line for line in output.splitlines() if line.startswith("|")]
+    return [[cell.strip() for cell in line.strip("|").split("|")] for line in lines[2:]]
+
+
+def main(program):
+    run = subprocess.run([program, "--quick"], stdout=subprocess.PIPE, text=True, timeout=100)
+    if run.returncode != 0:
+        return f"the benchmark ended with {run.returncode}"
+    seen = set()
+    for cells in rows_of(run.stdout):
+        if len(cells) != 6 or not FIGURE.match(cells[1]):
+            return f"a row without a figure: {cells}"
+        peer = PEER.match(cells[2])
+        if cells[2] and not peer:
+            return f"a row with a peer that was not measured: {cells}"
+        if bool(cells[4]) != bool(cells[5]):
+            return f"a row with a target that is not judged, or the other way round: {cells}"
+        seen.add((cells[0], peer["name"] if peer else ""))
+    missing = [(figure, peer) for figure, peers in ROWS for peer in peers if (figure, peer) not in seen]
+    return f"rows are missing: {missing}\n{run.stdout}" if missing else None
+
+
+if __name__ == "__main__":
+    if len(sys.argv) != 2:
+        sys.exit("usage: check_quick_run.py PROGRAM")
+    sys.exit(main(sys.argv[1]))
