@@ -16,6 +16,8 @@ enum class Writes {
 class Receiver {
  public:
   virtual ~Receiver() = default;
+  // Makes the message that the next round trip sends. Not measured.
+  virtual void prepare() {}
   // Sends one message and waits for the reply.
   virtual void roundTrip() = 0;
   // Sends so many messages, at most `outstanding` of them without their reply, and waits for all replies.

@@ -24,6 +24,7 @@ class Trips {
     Samples samples;
     samples.reserve(count);
     for (std::size_t i = 0; i < count; ++i) {
+      receiver_.prepare();
       const double start = nowSeconds();
       receiver_.roundTrip();
       samples.push_back(nowSeconds() - start);

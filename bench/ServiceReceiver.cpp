@@ -45,8 +45,11 @@ void ServiceReceiver::forget() {
   start();
 }
 
-void ServiceReceiver::roundTrip() {
+void ServiceReceiver::prepare() {
   renumber(request_, ++number_);
+}
+
+void ServiceReceiver::roundTrip() {
   mustBeOk(client_->call(request_), "sending a message");
 }
 

@@ -15,6 +15,7 @@ class ServiceReceiver final : public Receiver {
  public:
   ServiceReceiver(const Settings& settings, const ServiceSetup& setup, Writes writes);
 
+  void prepare() override;
   void roundTrip() override;
   void stream(std::size_t count, std::size_t outstanding) override;
   double processorSeconds() const override { return bench::processorSeconds(service_.id()); }
