@@ -39,7 +39,8 @@ void TarnReportingSessionTallyWorker::handleMessage(const std::shared_ptr<TarnRe
   const EventNames& names = namesFor(owner->serviceType(), message->category(), message->type());
   for (const std::string* name : {&names.ofMessage, &names.ofService}) {
     if (tally.eventIsInUse(*name)) {
-      tally.sendEventLazy(*name, [message] { return message->message(); });
+      // The payload as it is now: at the session's stop a producer may change the record in place.
+      tally.sendEventLazy(*name, [payload = message->message()] { return payload; });
     }
   }
 }

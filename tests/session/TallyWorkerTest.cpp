@@ -55,13 +55,13 @@ TEST_F(TallyWorker, SummaryIsForwardedAsAnEvent) {
                                                                    "sys.oxbow.alarms.Session_Generic.Summary"}));
 }
 
-TEST_F(TallyWorker, LatePayloadIsThatOfTheCall) {
+TEST_F(TallyWorker, LatePayloadIsThatOfTheHandOver) {
   platform_.tally.setPayloadCalls(FakeTallyService::PayloadCalls::Later);
   const auto record = message({{"a", 1}});
   makeSession()->sendMessage(record);
   record->mutableMessage().set("a", 2);
   platform_.tally.callPending();
-  EXPECT_EQ(platform_.tally.events().at(0).payload["a"].asInt64(), 2);
+  EXPECT_EQ(platform_.tally.events().at(0).payload["a"].asInt64(), 1);
 }
 
 TEST_F(TallyWorker, FloodOfKindsLeavesTheNamesRight) {
