@@ -1,0 +1,39 @@
+// TarnReportingSessionWorkerUtility: algorithms over messages that several workers share. Never made.
+//
+// Threads: the server queue.
+#pragma once
+
+#include <span>
+
+#include "plist/Key.h"
+#include "session/TarnReportingSessionMessage.h"
+
+namespace tarn {
+
+class TarnReportingSessionWorkerUtility {
+ public:
+  TarnReportingSessionWorkerUtility() = delete;
+
+  // Folds bursts of state messages into one, so that a client that tells of two settings in two messages a fraction of
+  // a second apart counts as one change. With the keys A and B and a pause of 5 seconds:
+  //
+  //   time     0    1      2    9    10   11
+  //   message  A    other  B    B    A    A
+  //   result   AB   other       B         A      (AB carries the time 2, the second B that of 10)
+  //
+  // A message is filed under the first of `keysToCombine` that it carries; one that carries none passes through. The
+  // first message filed heads a group. A later one with another key, less than the pause after the head's time, is
+  // merged into the head, time included, and left out. One that comes too late passes through, but the head stays. A
+  // key that the group has seen, merged or passed, begins a new group.
+  //
+  // Returns the messages that are left, in their order: the same records, not copies. The payloads of the heads are
+  // changed in place. `maximumPausetime` is in seconds.
+  static TarnReportingSessionMessages combineRapidMessages(const TarnReportingSessionMessages& messages,
+                                                           std::span<const plist::Key> keysToCombine,
+                                                           double maximumPausetime);
+
+  // Whether the message reports one of the video-call application's errors of invalid coordinates.
+  static bool isParleyXYerrorMessage(const TarnReportingSessionMessage& message);
+};
+
+}  // namespace tarn

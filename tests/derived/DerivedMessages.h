@@ -1,0 +1,46 @@
+// Builders of client messages and readers of derived ones, for the tests of the walks.
+#pragma once
+
+#include <memory>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "plist/Dictionary.h"
+#include "session/TarnReportingSessionMessage.h"
+
+namespace tarn::testing {
+
+inline std::shared_ptr<TarnReportingSessionMessage> unstamped(plist::Dictionary payload) {
+  return std::make_shared<TarnReportingSessionMessage>(std::move(payload), AudioEventCategory::Playback,
+                                                       AudioEventType::State);
+}
+
+// A message whose time stamp is any value.
+inline std::shared_ptr<TarnReportingSessionMessage> stamped(const plist::ValueView& time, plist::Dictionary payload) {
+  payload.set("tarnreporting_timestamp", time);
+  return unstamped(std::move(payload));
+}
+
+// A message of that many seconds.
+inline std::shared_ptr<TarnReportingSessionMessage> at(double seconds, plist::Dictionary payload = {}) {
+  return stamped(seconds, std::move(payload));
+}
+
+// The values of these keys, a text for each message: "10 0.5 1"; "(null)" for a key that isn't there.
+inline std::vector<std::string> rows(const TarnReportingSessionMessages& messages,
+                                     const std::vector<std::string>& keys) {
+  std::vector<std::string> texts;
+  for (const auto& message : messages) {
+    std::string row;
+    for (const std::string& key : keys) {
+      row += (row.empty() ? "" : " ") + message->message().get(key).asText();
+    }
+    texts.push_back(row);
+  }
+  return texts;
+}
+
+using Rows = std::vector<std::string>;
+
+}  // namespace tarn::testing
