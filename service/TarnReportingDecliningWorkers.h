@@ -37,12 +37,6 @@ class TarnReportingSessionTraceWorker : public TarnReportingDecliningWorker<Tarn
   static constexpr std::string_view kClassName = "TarnReportingSessionTraceWorker";
 };
 
-class TarnReportingSessionVolumeMessagesWorker
-    : public TarnReportingDecliningProducer<TarnReportingSessionVolumeMessagesWorker> {
- public:
-  static constexpr std::string_view kClassName = "TarnReportingSessionVolumeMessagesWorker";
-};
-
 class TarnReportingSessionLagoonMessagesWorker
     : public TarnReportingDecliningProducer<TarnReportingSessionLagoonMessagesWorker> {
  public:

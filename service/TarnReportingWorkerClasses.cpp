@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <array>
 
+#include "derived/TarnReportingSessionVolumeMessagesWorker.h"
 #include "service/TarnReportingDecliningWorkers.h"
 #include "session/TarnReportingSessionSummaryWorker.h"
 #include "session/TarnReportingSessionTallyWorker.h"

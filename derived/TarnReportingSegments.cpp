@@ -1,0 +1,64 @@
+#include "derived/TarnReportingSegments.h"
+
+#include <array>
+
+#include "service/TarnReportingUtility.h"
+
+namespace tarn {
+
+namespace {
+
+constexpr std::array<double, 11> kTimes{0, 1, 5, 10, 30, 60, 300, 1800, 3600, 7200, 18000};
+
+constexpr std::size_t kVolumeSteps = 16;
+constexpr std::array<double, kVolumeSteps + 1> kVolumes = [] {
+  std::array<double, kVolumeSteps + 1> bounds{};
+  for (std::size_t i = 0; i < bounds.size(); ++i) {
+    bounds[i] = static_cast<double>(i) / kVolumeSteps;
+  }
+  return bounds;
+}();
+
+const plist::Key kMessageCount("msgcnt");
+
+}  // namespace
+
+const plist::Key kTarnReportingMessageIndex("msgidx");
+
+bool TarnReportingNumbersDiffer(const plist::ValueView& first, const plist::ValueView& second) {
+  if (first.isNumber() && second.isNumber()) {
+    return !(first == second);
+  }
+  return first.asDouble() != second.asDouble();
+}
+
+bool TarnReportingTextsDiffer(const plist::ValueView& first, const plist::ValueView& second) {
+  if (first.isText() && second.isText()) {
+    return first.text() != second.text();
+  }
+  return first.asText() != second.asText();
+}
+
+std::span<const double> TarnReportingUtilityBucketNumberToStringTimes() noexcept {
+  return kTimes;
+}
+
+std::span<const double> TarnReportingUtilityBucketNumberToStringVolumes() noexcept {
+  return kVolumes;
+}
+
+std::string TarnReportingSegmentLengthLabel(double seconds) {
+  return TarnReportingUtilityBucketNumberToString(seconds, kTimes, 0).value_or(std::string());
+}
+
+std::string TarnReportingVolumeLabel(double volume) {
+  return TarnReportingUtilityBucketNumberToString(volume, kVolumes, 4).value_or(std::string());
+}
+
+void TarnReportingNumberMessages(const TarnReportingSessionMessages& derived) {
+  for (const auto& message : derived) {
+    message->mutableMessage().set(kMessageCount, derived.size());
+  }
+}
+
+}  // namespace tarn

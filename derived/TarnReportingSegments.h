@@ -1,0 +1,49 @@
+// What the walks that cut a session into segments have in common: when the segment began, how values are compared, the
+// buckets of lengths and volumes, and the numbering of the messages that come out.
+//
+// Threads: the server queue.
+#pragma once
+
+#include <span>
+#include <string>
+
+#include "plist/Key.h"
+#include "plist/ValueView.h"
+#include "session/TarnReportingSessionMessage.h"
+
+namespace tarn {
+
+// The beginning of the segment that runs, if one does. The time stamp is kept as the message has it, for the log; it
+// lies in that message's payload.
+class TarnReportingSegmentClock {
+ public:
+  // An absent time stamp leaves no beginning.
+  void startAt(const plist::ValueView& time) noexcept { start_ = time; }
+  void clear() noexcept { start_ = {}; }
+
+  bool started() const noexcept { return start_.present(); }
+  const plist::ValueView& start() const noexcept { return start_; }
+  // Seconds from the beginning to the time stamp; what is absent counts as 0.
+  double secondsUntil(const plist::ValueView& time) const noexcept { return time.asDouble() - start_.asDouble(); }
+
+ private:
+  plist::ValueView start_;
+};
+
+// Comparisons of values that should be numbers or texts; values of other kinds are read as such.
+bool TarnReportingNumbersDiffer(const plist::ValueView& first, const plist::ValueView& second);
+bool TarnReportingTextsDiffer(const plist::ValueView& first, const plist::ValueView& second);
+
+// The bounds of the bucket labels: seconds up to five hours, and volumes in steps of a sixteenth.
+std::span<const double> TarnReportingUtilityBucketNumberToStringTimes() noexcept;
+std::span<const double> TarnReportingUtilityBucketNumberToStringVolumes() noexcept;
+// The labels themselves.
+std::string TarnReportingSegmentLengthLabel(double seconds);
+std::string TarnReportingVolumeLabel(double volume);
+
+// The index of a message among the derived ones, from 1, and how many there are.
+extern const plist::Key kTarnReportingMessageIndex;
+// Tells each of the derived messages how many they are.
+void TarnReportingNumberMessages(const TarnReportingSessionMessages& derived);
+
+}  // namespace tarn
