@@ -43,12 +43,6 @@ class TarnReportingSessionLagoonMessagesWorker
   static constexpr std::string_view kClassName = "TarnReportingSessionLagoonMessagesWorker";
 };
 
-class TarnReportingSessionInputMessagesWorker
-    : public TarnReportingDecliningProducer<TarnReportingSessionInputMessagesWorker> {
- public:
-  static constexpr std::string_view kClassName = "TarnReportingSessionInputMessagesWorker";
-};
-
 class TarnReportingSessionWattlogWorker : public TarnReportingDecliningConsumer<TarnReportingSessionWattlogWorker> {
  public:
   static constexpr std::string_view kClassName = "TarnReportingSessionWattlogWorker";

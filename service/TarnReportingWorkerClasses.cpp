@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <array>
 
+#include "derived/TarnReportingSessionInputMessagesWorker.h"
 #include "derived/TarnReportingSessionVolumeMessagesWorker.h"
 #include "service/TarnReportingDecliningWorkers.h"
 #include "session/TarnReportingSessionSummaryWorker.h"

@@ -1,0 +1,37 @@
+// TarnReportingSessionInputMessagesWorker: when a session stops, cuts the time during which input ran into segments, at
+// every change of the devices, and sends one summary message a segment into the session: how long was recorded, with
+// which voice processing and which voice codecs.
+//
+// It does nothing while the session runs and keeps nothing.
+#pragma once
+
+#include <memory>
+#include <string_view>
+
+#include "session/TarnReportingSessionMessage.h"
+#include "session/TarnReportingSessionWorker.h"
+
+namespace tarn {
+
+class TarnReportingSessionInputMessagesWorker : public TarnReportingSessionWorkerProtocol,
+                                                public TarnReportingSessionWorkerProducerProtocol {
+ public:
+  static constexpr std::string_view kClassName = "TarnReportingSessionInputMessagesWorker";
+
+  // For every session.
+  static std::unique_ptr<TarnReportingSessionInputMessagesWorker> initWithSession(
+      const std::shared_ptr<TarnReportingSession>& session);
+  using TarnReportingSessionWorkerProtocol::TarnReportingSessionWorkerProtocol;
+
+  void stop();
+
+  // The summary messages of these messages, in order. `previousValues`: the latest values from before the first of
+  // them. `process`: the application's name; nothing comes out when it is empty. Segments of `minimumRunningtime`
+  // seconds or less are left out; the codecs seen in them count for the next message. Bursts of the spatial settings
+  // are folded into one message, in place.
+  static TarnReportingSessionMessages createInputMessages(const TarnReportingSessionMessages& messages,
+                                                          const plist::Dictionary& previousValues,
+                                                          std::string_view process, double minimumRunningtime);
+};
+
+}  // namespace tarn
