@@ -37,12 +37,6 @@ class TarnReportingSessionTraceWorker : public TarnReportingDecliningWorker<Tarn
   static constexpr std::string_view kClassName = "TarnReportingSessionTraceWorker";
 };
 
-class TarnReportingSessionLagoonMessagesWorker
-    : public TarnReportingDecliningProducer<TarnReportingSessionLagoonMessagesWorker> {
- public:
-  static constexpr std::string_view kClassName = "TarnReportingSessionLagoonMessagesWorker";
-};
-
 class TarnReportingSessionWattlogWorker : public TarnReportingDecliningConsumer<TarnReportingSessionWattlogWorker> {
  public:
   static constexpr std::string_view kClassName = "TarnReportingSessionWattlogWorker";

@@ -4,6 +4,7 @@
 #include <array>
 
 #include "derived/TarnReportingSessionInputMessagesWorker.h"
+#include "derived/TarnReportingSessionLagoonMessagesWorker.h"
 #include "derived/TarnReportingSessionVolumeMessagesWorker.h"
 #include "service/TarnReportingDecliningWorkers.h"
 #include "session/TarnReportingSessionSummaryWorker.h"
