@@ -1,0 +1,10 @@
+#include "derived/TarnReportingSessionOrientationMessagesWorker.h"
+
+namespace tarn {
+
+std::unique_ptr<TarnReportingSessionOrientationMessagesWorker>
+TarnReportingSessionOrientationMessagesWorker::initWithSession(const std::shared_ptr<TarnReportingSession>&) {
+  return nullptr;
+}
+
+}  // namespace tarn
