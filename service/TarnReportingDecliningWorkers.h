@@ -63,12 +63,6 @@ class TarnReportingSessionDriverSnapshotWorker
   static constexpr std::string_view kClassName = "TarnReportingSessionDriverSnapshotWorker";
 };
 
-class TarnReportingSessionSystemMonitorWorker
-    : public TarnReportingDecliningProducer<TarnReportingSessionSystemMonitorWorker> {
- public:
-  static constexpr std::string_view kClassName = "TarnReportingSessionSystemMonitorWorker";
-};
-
 class TarnReportingSessionSnareWorker : public TarnReportingDecliningConsumer<TarnReportingSessionSnareWorker> {
  public:
   static constexpr std::string_view kClassName = "TarnReportingSessionSnareWorker";

@@ -106,5 +106,88 @@ TEST_F(Settings, NotifyKeepsTheStateWordUnlessOneIsGiven) {
   EXPECT_EQ(ctl({"notify", "org.example.n", "--state", "x"}).status, 64);
 }
 
+// A session that runs while settings change, and what the recorder has of them.
+class SettingsInASession : public ServiceFixture {
+ protected:
+  void SetUp() override {
+    ASSERT_TRUE(startService({"--log-level", "debug"}));
+    client_ = connect();
+    ASSERT_TRUE(client_->createReportingSession(1).ok());
+    startSession();
+  }
+  void startSession() {
+    ASSERT_EQ(client_->startReportingSessionForID(1), client::SendStatus::Sent);
+    ASSERT_TRUE(client_->getAllReporters().ok());  // so the session has started
+  }
+  // What came for settings, once there are so many and nothing is under way any more.
+  std::vector<json> settings(std::size_t count) {
+    eventsOnceThereAre(count, kSettings);
+    ledgerAtRest();
+    std::vector<json> payloads;
+    for (const Event& event : events(kSettings)) {
+      payloads.push_back(event.payload);
+    }
+    return payloads;
+  }
+
+  static constexpr const char* kSettings = "sys.oxbow.tarnkit.Setup.Setup";
+  std::unique_ptr<client::TarnReportingClient> client_;
+};
+
+TEST_F(SettingsInASession, AChangedDefaultArrivesAsExactlyOneMessage) {
+  ASSERT_EQ(ctl({"defaults", "write", "sys.oxbow.tarnkit", "device_name", "\"kitchen\""}).status, 0);
+  ASSERT_EQ(ctl({"notify", "sys.oxbow.tarnkit.reporting"}).status, 0);
+  const auto payloads = settings(1);
+  ASSERT_EQ(payloads.size(), 1U);
+  json payload = payloads[0];
+  EXPECT_LE(payload.at("last_updated"), payload.at("tarnreporting_timestamp"));
+  EXPECT_GT(payload.at("last_updated"), 1.7e9);
+  payload.erase("last_updated");
+  payload.erase("tarnreporting_timestamp");
+  EXPECT_EQ(payload, (json{{"device_name", "kitchen"},
+                           {"invalid_timestamp", "nil"},
+                           {"audiotag", "SetupSetup"},
+                           {"HostApplicationDisplayID", "Unknown"}}));
+}
+
+TEST_F(SettingsInASession, ANotifiedStateArrivesAsExactlyOneMessage) {
+  ASSERT_EQ(ctl({"notify", "sys.oxbow.homeshell.ringerstate", "--state", "1"}).status, 0);
+  const auto payloads = settings(1);
+  ASSERT_EQ(payloads.size(), 1U);
+  EXPECT_EQ(payloads[0].at("ringerstate"), true);
+  EXPECT_GT(payloads[0].at("last_updated"), 1.7e9);
+  EXPECT_FALSE(payloads[0].contains("systemuptime_sec"));
+}
+
+TEST_F(SettingsInASession, ANotificationWithoutAChangeBringsNoMessage) {
+  for (int round = 0; round < 2; ++round) {
+    ASSERT_EQ(ctl({"notify", "sys.oxbow.homeshell.ringerstate", "--state", "1"}).status, 0);
+    ASSERT_TRUE(eventually([&] {
+      const std::string log = serviceLog();
+      const auto first = log.find("feature changes featureName=ringerstate");
+      return first != std::string::npos &&
+             (round == 0 || log.find("feature changes featureName=ringerstate", first + 1) != std::string::npos);
+    }));
+  }
+  EXPECT_EQ(settings(1).size(), 1U);
+}
+
+TEST_F(SettingsInASession, AStoppedSessionHearsOfNoSetting) {
+  ASSERT_TRUE(client_->stopReportingSessionForID(1).ok());
+  ASSERT_EQ(ctl({"notify", "sys.oxbow.homeshell.ringerstate", "--state", "1"}).status, 0);
+  ASSERT_TRUE(eventually([&] { return logSays("Updating value featureName=ringerstate"); }));
+  EXPECT_TRUE(settings(0).empty());
+}
+
+TEST_F(SettingsInASession, ASecondStartBringsTheSettingsThatAreKnown) {
+  ASSERT_TRUE(client_->stopReportingSessionForID(1).ok());
+  ASSERT_EQ(ctl({"notify", "sys.oxbow.homeshell.ringerstate", "--state", "2"}).status, 0);
+  ASSERT_TRUE(eventually([&] { return logSays("Updating value featureName=ringerstate"); }));
+  startSession();
+  const auto payloads = settings(1);
+  ASSERT_EQ(payloads.size(), 1U);
+  EXPECT_EQ(payloads[0].at("ringerstate"), false);
+}
+
 }  // namespace
 }  // namespace tarn::e2e
