@@ -74,12 +74,6 @@ class TarnReportingSessionDPWorker : public TarnReportingDecliningConsumer<TarnR
   static constexpr std::string_view kClassName = "TarnReportingSessionDPWorker";
 };
 
-class TarnReportingSessionSummaryJsonFileWorker
-    : public TarnReportingDecliningWorker<TarnReportingSessionSummaryJsonFileWorker> {
- public:
-  static constexpr std::string_view kClassName = "TarnReportingSessionSummaryJsonFileWorker";
-};
-
 class TarnReportingSessionAudioRegistrationWorker
     : public TarnReportingDecliningConsumer<TarnReportingSessionAudioRegistrationWorker> {
  public:

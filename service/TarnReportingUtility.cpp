@@ -11,6 +11,7 @@
 #include "platform/Condition.h"
 #include "platform/DeviceProperties.h"
 #include "platform/Facilities.h"
+#include "platform/FileSystem.h"
 #include "platform/WorkQueue.h"
 #include "service/TarnReportingInstallation.h"
 #include "service/TarnReportingLog.h"
@@ -187,6 +188,11 @@ bool TarnReportingUtilityKeyIsPresentAndHasChanged(const plist::Key& key, const 
   const plist::ValueView before = first->get(key);
   const plist::ValueView after = second->get(key);
   return before.present() && after.present() && !(before == after);
+}
+
+std::string TarnReportingLogsDirectory() {
+  return TarnReportingFacilities().fileSystem.wellKnownDirectory(platform::WellKnownDirectory::DiagnosticLogs) +
+         "/Audio/Reporting";
 }
 
 const std::shared_ptr<platform::WorkQueue>& TarnReportingUtilityGetReportingServerQueue() {

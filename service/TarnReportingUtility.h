@@ -50,6 +50,9 @@ std::optional<std::string> TarnReportingUtilityBucketNumberToString(double numbe
 bool TarnReportingUtilityKeyIsPresentAndHasChanged(const plist::Key& key, const plist::Dictionary* first,
                                                    const plist::Dictionary* second);
 
+// The directory of the summary files: "Audio/Reporting" in the device user's diagnostic logs. It need not exist yet.
+std::string TarnReportingLogsDirectory();
+
 // The one serial queue on which all client, session and worker work runs; made on first use. Threads: any.
 const std::shared_ptr<platform::WorkQueue>& TarnReportingUtilityGetReportingServerQueue();
 

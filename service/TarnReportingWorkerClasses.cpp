@@ -5,6 +5,7 @@
 
 #include "derived/TarnReportingSessionInputMessagesWorker.h"
 #include "derived/TarnReportingSessionLagoonMessagesWorker.h"
+#include "derived/TarnReportingSessionSummaryJsonFileWorker.h"
 #include "derived/TarnReportingSessionSystemMonitorWorker.h"
 #include "derived/TarnReportingSessionVolumeMessagesWorker.h"
 #include "service/TarnReportingDecliningWorkers.h"

@@ -1,0 +1,187 @@
+#include "derived/TarnReportingSessionSummaryJsonFileWorker.h"
+
+#include <algorithm>
+#include <cstdint>
+#include <mutex>
+#include <unordered_map>
+#include <utility>
+
+#include "platform/Clock.h"
+#include "platform/Facilities.h"
+#include "platform/LocalCalendar.h"
+#include "plist/Json.h"
+#include "plist/PrettyJson.h"
+#include "service/TarnReportingLog.h"
+#include "service/TarnReportingPlatform.h"
+#include "service/TarnReportingUtility.h"
+#include "session/TarnReportingSession.h"
+#include "session/TarnReportingSessionMessage.h"
+
+namespace tarn {
+
+namespace {
+
+constexpr std::string_view kModule = "TarnReportingSessionSummaryJsonFileWorker";
+constexpr std::uint32_t kDirectoryPermissions = 0777;  // less the process's mask
+// Files of one session ID, application and service that were begun in the same second; one more is an error.
+constexpr int kMostFilesOfOneName = 10000;
+
+// How many messages of a name, which tells category and type, are in the file.
+using Counts = std::unordered_map<std::string, std::uint64_t>;
+
+template <class... Arguments>
+void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
+  TarnReportingLog(TarnReportingSessionCategory(), level, kModule, text, arguments...);
+}
+
+// The file's path without ".json".
+std::string pathStem(const std::string& directory, const TarnReportingSession& session) {
+  const platform::Facilities& facilities = TarnReportingFacilities();
+  std::string application = TarnReportingUtilityRetrieveAppName(session.configuration());
+  // What no file name can hold.
+  std::replace_if(
+      application.begin(), application.end(), [](char character) { return character == '/' || character == '\0'; },
+      '_');
+  std::string stem = directory + "/";
+  stem += facilities.localCalendar.format(facilities.clock.epochSeconds(), "yyyyMMdd-HHmmssZ");
+  stem += "-" + std::to_string(session.reporterID()) + "-" + application + "-";
+  stem += TarnReportingUtilityGenerateServiceNameFromServiceType(session.serviceType());
+  return stem;
+}
+
+// Makes an empty file under the first name that is free. `path` is the name that was tried last.
+platform::MaybeError createFile(const std::string& stem, std::string& path) {
+  platform::FileSystem& files = TarnReportingFacilities().fileSystem;
+  path = stem + ".json";
+  platform::MaybeError error = files.createFile(path);
+  for (int number = 2; error && number <= kMostFilesOfOneName && files.exists(path); ++number) {
+    path = stem + "-" + std::to_string(number) + ".json";
+    error = files.createFile(path);
+  }
+  return error;
+}
+
+void markSessionStarted(TarnReportingSessionMessage& message) {
+  static const plist::Key kIsSessionStarted("isSessionStarted");
+  const std::lock_guard guard(message);
+  message.mutableMessage().set(kIsSessionStarted, message.isSessionStarted() ? "YES" : "NO");
+}
+
+// Forms the message's object in `text`, replacing what is there. Whether JSON can hold it; what can't isn't counted.
+bool formObject(std::string& text, const TarnReportingSessionMessage& message, Counts& counts) {
+  std::string name = TarnReportingUtilityCategoryString(message.category()) + "_";
+  name += TarnReportingUtilityTypeString(message.type());
+  std::uint64_t& count = counts[name];
+  text = "{\n  ";
+  plist::appendJsonText(text, name + "_" + std::to_string(count + 1));
+  text += ": ";
+  if (const auto misfit = plist::appendPrettyJson(text, message.message(), 1)) {
+    log(LogLevel::Error, "dataWithJSONObject: %@", *misfit);
+    return false;
+  }
+  text += "\n}";
+  ++count;
+  return true;
+}
+
+}  // namespace
+
+std::unique_ptr<TarnReportingSessionSummaryJsonFileWorker> TarnReportingSessionSummaryJsonFileWorker::initWithSession(
+    const std::shared_ptr<TarnReportingSession>& session) {
+  if (session->serviceType() != AudioServiceType::Test && !TarnReportingUtilityIsInternalBuild()) {
+    return nullptr;
+  }
+  auto worker = std::make_unique<TarnReportingSessionSummaryJsonFileWorker>(session);
+  worker->setStarted(true);
+  return worker;
+}
+
+void TarnReportingSessionSummaryJsonFileWorker::stop() {
+  const std::shared_ptr<TarnReportingSession> owner = session();
+  if (!owner || owner->messages().empty()) {
+    return;
+  }
+  writeMessages(*owner);
+  closeFile();
+}
+
+void TarnReportingSessionSummaryJsonFileWorker::writeMessages(const TarnReportingSession& session) {
+  Counts counts;
+  std::string object;
+  bool needsComma = false;
+  for (const auto& message : session.messages()) {
+    if (message->isRedundant()) {
+      continue;
+    }
+    if (reportPath_.empty() && !openFile(session)) {
+      return;
+    }
+    markSessionStarted(*message);
+    if (!formObject(object, *message, counts)) {
+      continue;
+    }
+    if ((needsComma && !writeLine(",")) || !writeLine(object)) {
+      return;
+    }
+    needsComma = true;
+  }
+}
+
+bool TarnReportingSessionSummaryJsonFileWorker::openFile(const TarnReportingSession& session) {
+  platform::FileSystem& files = TarnReportingFacilities().fileSystem;
+  const std::string directory = TarnReportingLogsDirectory();
+  if (const auto error = files.createDirectories(directory, kDirectoryPermissions)) {
+    log(LogLevel::Error, "can't create logging directory at %@: %@", directory, error->text);
+  }
+  std::string path;
+  platform::MaybeError error = createFile(pathStem(directory, session), path);
+  if (!error) {
+    auto opened = files.openForWriting(path);
+    error = std::move(opened.error);
+    reportFileHandle_ = std::move(opened.value);
+  }
+  if (error) {
+    log(LogLevel::Error, "SummaryJsonFileWorker failed to open file. action=open file=%@ error=\"%@\"", path,
+        error->text);
+    setStarted(false);
+    return false;
+  }
+  log(LogLevel::Info, "SummaryJsonFileWorker opened file. action=open file=%@", path);
+  reportPath_ = std::move(path);
+  writeFailed_ = false;
+  setStarted(true);
+  return writeLine("[");
+}
+
+bool TarnReportingSessionSummaryJsonFileWorker::writeLine(std::string_view line) {
+  if (writeFailed_) {
+    return false;  // behind a gap the rest would be worth nothing
+  }
+  platform::MaybeError error = reportFileHandle_->write(line);
+  if (!error) {
+    error = reportFileHandle_->write("\n");
+  }
+  if (error) {
+    log(LogLevel::Error, "SummaryJsonFileWorker failed to write line. action=writeline file=%@ error=\"%@\"",
+        reportPath_, error->text);
+    writeFailed_ = true;
+  }
+  return !writeFailed_;
+}
+
+void TarnReportingSessionSummaryJsonFileWorker::closeFile() {
+  if (!reportFileHandle_) {
+    return;
+  }
+  writeLine("]");
+  if (const auto error = reportFileHandle_->close()) {
+    log(LogLevel::Error, "SummaryJsonFileWorker failed to closed file. action=close file=%@ error=\"%@\"", reportPath_,
+        error->text);
+  } else {
+    log(LogLevel::Info, "SummaryJsonFileWorker closed file. action=close file=%@", reportPath_);
+  }
+  reportFileHandle_.reset();
+  reportPath_.clear();
+}
+
+}  // namespace tarn
