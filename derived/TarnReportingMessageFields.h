@@ -11,7 +11,8 @@
 #include <array>
 #include <cstddef>
 
-#include "plist/Dictionary.h"
+#include "plist/Key.h"
+#include "plist/ValueView.h"
 
 namespace tarn {
 
@@ -22,9 +23,11 @@ class TarnReportingMessageFields {
   using Keys = std::array<plist::Key, kCount>;
 
   TarnReportingMessageFields() = default;
-  TarnReportingMessageFields(const Keys& keys, const plist::Dictionary& payload) noexcept {
+  // `source`: a payload, or whatever else has values under keys.
+  template <class Source>
+  TarnReportingMessageFields(const Keys& keys, const Source& source) noexcept {
     for (std::size_t i = 0; i < kCount; ++i) {
-      values_[i] = payload.get(keys[i]);
+      values_[i] = source.get(keys[i]);
     }
   }
 

@@ -56,7 +56,7 @@ const std::array<plist::Key, 2> kKeysToCombine{plist::Key("spatial-audio-accesso
                                                plist::Key("spatializationEnabled")};
 
 // The format's two values, which nothing here looks at, are left out of the state.
-Fields initialState(const plist::Dictionary& previousValues) {
+Fields initialState(const TarnReportingSessionPreviousValues& previousValues) {
   Fields state;
   for (const Field field :
        {Field::ActiveDevices, Field::OperationMode, Field::InputPort, Field::VocoderRate, Field::Vocoder}) {
@@ -68,7 +68,8 @@ Fields initialState(const plist::Dictionary& previousValues) {
 
 class InputWalk {
  public:
-  InputWalk(const plist::Dictionary& previousValues, std::string_view process, double minimumRunningtime)
+  InputWalk(const TarnReportingSessionPreviousValues& previousValues, std::string_view process,
+            double minimumRunningtime)
       : process_(process), minimumRunningtime_(minimumRunningtime), state_(initialState(previousValues)) {}
   void take(const plist::Dictionary& payload);
   TarnReportingSessionMessages finish();
@@ -188,8 +189,8 @@ TarnReportingSessionMessages InputWalk::finish() {
 }  // namespace
 
 TarnReportingSessionMessages TarnReportingSessionInputMessagesWorker::createInputMessages(
-    const TarnReportingSessionMessages& messages, const plist::Dictionary& previousValues, std::string_view process,
-    double minimumRunningtime) {
+    const TarnReportingSessionMessages& messages, const TarnReportingSessionPreviousValues& previousValues,
+    std::string_view process, double minimumRunningtime) {
   TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, kModule, "entering createInputMessages %s",
                    kOperation);
   const TarnReportingSessionMessages combined =
@@ -211,10 +212,9 @@ void TarnReportingSessionInputMessagesWorker::stop() {
   if (!owner || owner->messages().empty()) {
     return;
   }
-  const TarnReportingSessionMessages derived =
-      createInputMessages(owner->messages(), owner->previousValues().dictionary(),
-                          TarnReportingUtilityRetrieveAppName(owner->configuration()),
-                          TarnReportingUtilityVolumeMinimumPlayingTime(owner->serviceType()));
+  const TarnReportingSessionMessages derived = createInputMessages(
+      owner->messages(), owner->previousValues(), TarnReportingUtilityRetrieveAppName(owner->configuration()),
+      TarnReportingUtilityVolumeMinimumPlayingTime(owner->serviceType()));
   if (derived.empty()) {
     return;
   }

@@ -9,6 +9,7 @@
 #include <string_view>
 
 #include "session/TarnReportingSessionMessage.h"
+#include "session/TarnReportingSessionPreviousValues.h"
 #include "session/TarnReportingSessionWorker.h"
 
 namespace tarn {
@@ -30,7 +31,7 @@ class TarnReportingSessionInputMessagesWorker : public TarnReportingSessionWorke
   // seconds or less are left out; the codecs seen in them count for the next message. Bursts of the spatial settings
   // are folded into one message, in place.
   static TarnReportingSessionMessages createInputMessages(const TarnReportingSessionMessages& messages,
-                                                          const plist::Dictionary& previousValues,
+                                                          const TarnReportingSessionPreviousValues& previousValues,
                                                           std::string_view process, double minimumRunningtime);
 };
 

@@ -95,7 +95,7 @@ bool isInGroup(const plist::ValueView& groupSession) {
 
 class LagoonWalk {
  public:
-  LagoonWalk(const plist::Dictionary& previousValues, double minimumPlaytime);
+  LagoonWalk(const TarnReportingSessionPreviousValues& previousValues, double minimumPlaytime);
   void take(const plist::Dictionary& payload);
   TarnReportingSessionMessages finish();
 
@@ -112,7 +112,7 @@ class LagoonWalk {
   TarnReportingSessionMessages derived_;
 };
 
-LagoonWalk::LagoonWalk(const plist::Dictionary& previousValues, double minimumPlaytime)
+LagoonWalk::LagoonWalk(const TarnReportingSessionPreviousValues& previousValues, double minimumPlaytime)
     : minimumPlaytime_(minimumPlaytime),
       state_(kKeys, previousValues),
       running_(state_[Field::Running].asBool()),
@@ -198,7 +198,8 @@ TarnReportingSessionMessages LagoonWalk::finish() {
 }  // namespace
 
 TarnReportingSessionMessages TarnReportingSessionLagoonMessagesWorker::createLagoonMessages(
-    const TarnReportingSessionMessages& messages, const plist::Dictionary& previousValues, double minimumPlaytime) {
+    const TarnReportingSessionMessages& messages, const TarnReportingSessionPreviousValues& previousValues,
+    double minimumPlaytime) {
   TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, kModule, "entering createLagoonMessages %s",
                    kOperation);
   LagoonWalk walk(previousValues, minimumPlaytime);
@@ -218,9 +219,8 @@ void TarnReportingSessionLagoonMessagesWorker::stop() {
   if (!owner || owner->messages().empty()) {
     return;
   }
-  const TarnReportingSessionMessages derived =
-      createLagoonMessages(owner->messages(), owner->previousValues().dictionary(),
-                           TarnReportingUtilityVolumeMinimumPlayingTime(owner->serviceType()));
+  const TarnReportingSessionMessages derived = createLagoonMessages(
+      owner->messages(), owner->previousValues(), TarnReportingUtilityVolumeMinimumPlayingTime(owner->serviceType()));
   if (derived.empty()) {
     return;
   }

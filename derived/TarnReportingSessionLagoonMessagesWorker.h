@@ -9,6 +9,7 @@
 #include <string_view>
 
 #include "session/TarnReportingSessionMessage.h"
+#include "session/TarnReportingSessionPreviousValues.h"
 #include "session/TarnReportingSessionWorker.h"
 
 namespace tarn {
@@ -28,7 +29,7 @@ class TarnReportingSessionLagoonMessagesWorker : public TarnReportingSessionWork
   // The summary messages of these messages, in order, addressed as stop does. `previousValues`: the latest values from
   // before the first of them. Segments of `minimumPlaytime` seconds or less are left out.
   static TarnReportingSessionMessages createLagoonMessages(const TarnReportingSessionMessages& messages,
-                                                           const plist::Dictionary& previousValues,
+                                                           const TarnReportingSessionPreviousValues& previousValues,
                                                            double minimumPlaytime);
 };
 

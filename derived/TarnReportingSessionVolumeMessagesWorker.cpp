@@ -62,7 +62,7 @@ const Fields::Keys kKeys{plist::Key("tarnreporting_timestamp"),
 
 const std::array<plist::Key, 2> kKeysToCombine{kSpatialAccessory, kSpatialization};
 
-Fields initialState(const plist::Dictionary& previousValues) {
+Fields initialState(const TarnReportingSessionPreviousValues& previousValues) {
   Fields state;
   state[Field::SelectedFormat] = "unknown";
   state[Field::ActiveDevices] = "unknown";
@@ -77,7 +77,8 @@ Fields initialState(const plist::Dictionary& previousValues) {
 
 class VolumeWalk {
  public:
-  VolumeWalk(const plist::Dictionary& previousValues, std::string_view process, double minimumPlaytime);
+  VolumeWalk(const TarnReportingSessionPreviousValues& previousValues, std::string_view process,
+             double minimumPlaytime);
   void take(const plist::Dictionary& payload);
   TarnReportingSessionMessages finish();
 
@@ -94,7 +95,8 @@ class VolumeWalk {
   TarnReportingSessionMessages derived_;
 };
 
-VolumeWalk::VolumeWalk(const plist::Dictionary& previousValues, std::string_view process, double minimumPlaytime)
+VolumeWalk::VolumeWalk(const TarnReportingSessionPreviousValues& previousValues, std::string_view process,
+                       double minimumPlaytime)
     : process_(process), minimumPlaytime_(minimumPlaytime), state_(initialState(previousValues)) {
   if (state_[Field::Running].asBool()) {
     clock_.startAt(state_[Field::Timestamp]);
@@ -189,8 +191,8 @@ TarnReportingSessionMessages VolumeWalk::finish() {
 }  // namespace
 
 TarnReportingSessionMessages TarnReportingSessionVolumeMessagesWorker::createVolumeMessages(
-    const TarnReportingSessionMessages& messages, const plist::Dictionary& previousValues, std::string_view process,
-    double minimumPlaytime) {
+    const TarnReportingSessionMessages& messages, const TarnReportingSessionPreviousValues& previousValues,
+    std::string_view process, double minimumPlaytime) {
   TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, kModule, "entering createVolumeMessages %s",
                    kOperation);
   const TarnReportingSessionMessages combined =
@@ -212,10 +214,9 @@ void TarnReportingSessionVolumeMessagesWorker::stop() {
   if (!owner || owner->messages().empty()) {
     return;
   }
-  const TarnReportingSessionMessages derived =
-      createVolumeMessages(owner->messages(), owner->previousValues().dictionary(),
-                           TarnReportingUtilityRetrieveAppName(owner->configuration()),
-                           TarnReportingUtilityVolumeMinimumPlayingTime(owner->serviceType()));
+  const TarnReportingSessionMessages derived = createVolumeMessages(
+      owner->messages(), owner->previousValues(), TarnReportingUtilityRetrieveAppName(owner->configuration()),
+      TarnReportingUtilityVolumeMinimumPlayingTime(owner->serviceType()));
   if (derived.empty()) {
     return;
   }

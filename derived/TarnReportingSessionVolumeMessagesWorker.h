@@ -9,6 +9,7 @@
 #include <string_view>
 
 #include "session/TarnReportingSessionMessage.h"
+#include "session/TarnReportingSessionPreviousValues.h"
 #include "session/TarnReportingSessionWorker.h"
 
 namespace tarn {
@@ -29,7 +30,7 @@ class TarnReportingSessionVolumeMessagesWorker : public TarnReportingSessionWork
   // them. `process`: the application's name; nothing comes out when it is empty. Segments of `minimumPlaytime` seconds
   // or less are left out. Bursts of the spatial settings are folded into one message, in place.
   static TarnReportingSessionMessages createVolumeMessages(const TarnReportingSessionMessages& messages,
-                                                           const plist::Dictionary& previousValues,
+                                                           const TarnReportingSessionPreviousValues& previousValues,
                                                            std::string_view process, double minimumPlaytime);
 };
 

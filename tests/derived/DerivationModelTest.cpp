@@ -205,7 +205,7 @@ TEST_F(DerivationModel, VolumeMessagesAreWhatTheirModelSays) {
       [](Stream& stream) {
         const TarnReportingSessionMessages messages = records(stream);
         const auto derived = TarnReportingSessionVolumeMessagesWorker::createVolumeMessages(
-            messages, dictionaryOf(stream.previous), stream.process, 0.5);
+            messages, previous(dictionaryOf(stream.previous)), stream.process, 0.5);
         expectPayloads(derived, volumeModel(stream.messages, stream.previous, stream.process));
         expectPayloads(messages, stream.messages);
         return derived.size();
@@ -219,7 +219,7 @@ TEST_F(DerivationModel, InputMessagesAreWhatTheirModelSays) {
       [](Stream& stream) {
         const TarnReportingSessionMessages messages = records(stream);
         const auto derived = TarnReportingSessionInputMessagesWorker::createInputMessages(
-            messages, dictionaryOf(stream.previous), stream.process, 0.5);
+            messages, previous(dictionaryOf(stream.previous)), stream.process, 0.5);
         expectPayloads(derived, inputModel(stream.messages, stream.previous, stream.process));
         expectPayloads(messages, stream.messages);
         return derived.size();
@@ -232,7 +232,7 @@ TEST_F(DerivationModel, LagoonMessagesAreWhatTheirModelSays) {
       [](Stream& stream) {
         const TarnReportingSessionMessages messages = records(stream);
         const auto derived = TarnReportingSessionLagoonMessagesWorker::createLagoonMessages(
-            messages, dictionaryOf(stream.previous), 0.5);
+            messages, previous(dictionaryOf(stream.previous)), 0.5);
         expectPayloads(derived, lagoonModel(stream.messages, stream.previous));
         expectPayloads(messages, stream.messages);
         return derived.size();

@@ -8,6 +8,7 @@
 
 #include "plist/Dictionary.h"
 #include "session/TarnReportingSessionMessage.h"
+#include "session/TarnReportingSessionPreviousValues.h"
 
 namespace tarn::testing {
 
@@ -25,6 +26,13 @@ inline std::shared_ptr<TarnReportingSessionMessage> stamped(const plist::ValueVi
 // A message of that many seconds.
 inline std::shared_ptr<TarnReportingSessionMessage> at(double seconds, plist::Dictionary payload = {}) {
   return stamped(seconds, std::move(payload));
+}
+
+// Previous values of just these.
+inline TarnReportingSessionPreviousValues previous(const plist::Dictionary& values) {
+  TarnReportingSessionPreviousValues previousValues;
+  previousValues.merge(values);
+  return previousValues;
 }
 
 // The values of these keys, a text for each message: "10 0.5 1"; "(null)" for a key that isn't there.

@@ -18,7 +18,8 @@ class CreateInputMessages : public ::testing::Test {
   static TarnReportingSessionMessages create(const TarnReportingSessionMessages& messages,
                                              const plist::Dictionary& previousValues = {},
                                              std::string_view process = "phone") {
-    return TarnReportingSessionInputMessagesWorker::createInputMessages(messages, previousValues, process, 0.5);
+    return TarnReportingSessionInputMessagesWorker::createInputMessages(messages, previous(previousValues), process,
+                                                                        0.5);
   }
   static std::shared_ptr<TarnReportingSessionMessage> start(double time, plist::Dictionary more = {}) {
     more.set("session_input_running", true);

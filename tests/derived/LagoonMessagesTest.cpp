@@ -16,7 +16,7 @@ class CreateLagoonMessages : public ::testing::Test {
  protected:
   static TarnReportingSessionMessages create(const TarnReportingSessionMessages& messages,
                                              const plist::Dictionary& previousValues = {}) {
-    return TarnReportingSessionLagoonMessagesWorker::createLagoonMessages(messages, previousValues, 0.5);
+    return TarnReportingSessionLagoonMessagesWorker::createLagoonMessages(messages, previous(previousValues), 0.5);
   }
   // Output starts inside a group session.
   static std::shared_ptr<TarnReportingSessionMessage> start(double time, plist::Dictionary more = {}) {

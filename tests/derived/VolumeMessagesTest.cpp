@@ -18,7 +18,8 @@ class CreateVolumeMessages : public ::testing::Test {
   static TarnReportingSessionMessages create(const TarnReportingSessionMessages& messages,
                                              const plist::Dictionary& previousValues = {},
                                              std::string_view process = "music") {
-    return TarnReportingSessionVolumeMessagesWorker::createVolumeMessages(messages, previousValues, process, 0.5);
+    return TarnReportingSessionVolumeMessagesWorker::createVolumeMessages(messages, previous(previousValues), process,
+                                                                          0.5);
   }
   static std::shared_ptr<TarnReportingSessionMessage> start(double time, plist::Dictionary more = {}) {
     more.set("session_output_running", true);
