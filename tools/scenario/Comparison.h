@@ -1,6 +1,7 @@
 // Comparison: sets what the recorder holds against what must be there, and says of each difference exactly what it is.
 #pragma once
 
+#include <cstdint>
 #include <map>
 #include <string>
 #include <vector>
@@ -24,6 +25,8 @@ class Comparison {
 
   // Each adds what differs to differences().
   void compareEvents(const std::vector<RecordedEvent>& events);
+  // Afterwards: whether any message of this kind ("volume", "input") was derived by the service.
+  void requireDerived(const std::string& kind);
   void compareLedger(const json& ledger, std::size_t eventCount);
   // `replies`: what the client that played the script printed.
   void compareReplies(const Expectation& expectation, const std::vector<json>& replies);
@@ -35,6 +38,7 @@ class Comparison {
  private:
   using Lane = std::vector<const RecordedEvent*>;
   void compareLane(const std::string& application, const std::vector<ExpectedEvent>& expected, const Lane& found);
+  std::size_t takeDerived(const std::string& where, const Lane& found, std::size_t at);
   void compareUptimes(const Lane& found);
   std::string differenceOf(const ExpectedEvent& expected, const RecordedEvent& found) const;
   bool takeFreshStamp(json& payload, const std::string& key) const;
@@ -45,6 +49,8 @@ class Comparison {
   const Circumstances circumstances_;
   std::vector<std::string> differences_;
   std::size_t matched_ = 0;
+  std::map<std::string, std::size_t> derived_;  // messages by kind
+  std::int64_t derivedBeforeSummary_ = 0;       // messages that the next summary counts beside the scripts' own
 };
 
 }  // namespace tarn::scenario

@@ -130,6 +130,8 @@ int run(const Options& options) {
 
   Comparison comparison(expectations, circumstances);
   comparison.compareEvents(events);
+  comparison.requireDerived("volume");
+  comparison.requireDerived("input");
   comparison.compareLedger(ledger, events.size());
   for (const Expectation& expectation : expectations) {
     comparison.compareReplies(expectation, jsonLines(directory.path() + "/" + expectation.script + ".replies"));
