@@ -233,7 +233,7 @@ struct Misfit {
   plist::Value value;
   std::string complaint;
 };
-void PrintTo(const Misfit& misfit, std::ostream* out) {
+void PrintTo(const Misfit& misfit, std::ostream* out) {  // NOLINT(readability-identifier-naming): as gtest calls it
   *out << misfit.name;
 }
 

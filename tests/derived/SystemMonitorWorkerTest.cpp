@@ -22,10 +22,11 @@ constexpr const char* kRinger = "ringerstate";
 constexpr const char* kRingerChanged = "sys.oxbow.homeshell.ringerstate";
 
 class SystemMonitorWorker : public SessionFixture {
- protected:
+ public:
   SystemMonitorWorker() { useWorkers<TarnReportingSessionSystemMonitorWorker, ConsumerWorker>(); }
   ~SystemMonitorWorker() override { TarnReportingSystemMonitor::reset(); }
 
+ protected:
   static void startMonitor() {
     TarnReportingSystemMonitor::initializeWithQueue(TarnReportingUtilityGetReportingServerQueue());
   }
@@ -241,7 +242,7 @@ class LockingWorker : public TarnReportingSessionWorkerProtocol, public TarnRepo
   void handleMessage(const std::shared_ptr<TarnReportingSessionMessage>&) override {
     std::thread other([] {
       const std::lock_guard guard(*TarnReportingSystemMonitor::getSystemMonitorDictionary());
-      trail().push_back("got in");  // never, if the lock were held
+      trail().emplace_back("got in");  // never, if the lock were held
     });
     other.join();
   }
