@@ -1,5 +1,7 @@
 #include "plist/PackedBuilder.h"
 
+#include <algorithm>
+
 #include "plist/KeyListBody.h"
 #include "plist/Packed.h"
 
@@ -28,7 +30,7 @@ PackedBuilder::~PackedBuilder() {
 }
 
 void PackedBuilder::begin() {
-  levels_.push_back({bytes_.size(), keys_.size(), 0, 0, false});
+  levels_.push_back({used_, keys_.size(), 0, 0, false});
 }
 
 void PackedBuilder::add(std::string_view key, const ValueView& value) {
@@ -38,9 +40,12 @@ void PackedBuilder::add(std::string_view key, const ValueView& value) {
 }
 
 void PackedBuilder::add(const ValueView& value) {
-  const std::size_t at = bytes_.size();
-  bytes_.resize(at + Packed::sizeOf(value));
-  Packed::write(bytes_.data() + at, value);
+  const std::size_t size = Packed::sizeOf(value);
+  if (bytes_.size() - used_ < size) [[unlikely]] {
+    bytes_.resize(std::max(2 * bytes_.size(), used_ + size));
+  }
+  Packed::write(bytes_.data() + used_, value);
+  used_ += size;
   Level& level = levels_.back();
   ++level.count;
   level.holdsContainers = level.holdsContainers || value.kind() == Kind::Array || value.kind() == Kind::Dictionary;
@@ -49,20 +54,20 @@ void PackedBuilder::add(const ValueView& value) {
 // Takes the innermost level's bytes, and the references they hold, into a block.
 detail::Body* PackedBuilder::takeBody() {
   const Level& level = levels_.back();
-  const std::size_t size = bytes_.size() - level.bytesBegin;
+  const std::size_t size = used_ - level.bytesBegin;
   detail::Body* body = detail::makeBody(size);
   body->holdsContainers = level.holdsContainers ? 1 : 0;
   std::memcpy(body->data(), bytes_.data() + level.bytesBegin, size);
-  bytes_.resize(level.bytesBegin);
+  used_ = level.bytesBegin;
   return body;
 }
 
 void PackedBuilder::dropLevel() noexcept {
   const Level& level = levels_.back();
   if (level.holdsContainers) {
-    detail::releaseContainers(bytes_.data() + level.bytesBegin, bytes_.data() + bytes_.size());
+    detail::releaseContainers(bytes_.data() + level.bytesBegin, bytes_.data() + used_);
   }
-  bytes_.resize(level.bytesBegin);
+  used_ = level.bytesBegin;
   keys_.resize(level.keysBegin);
   levels_.pop_back();
 }

@@ -58,7 +58,8 @@ class PackedBuilder {
   detail::Body* takeBody();
   void dropLevel() noexcept;
 
-  std::vector<std::byte> bytes_;
+  std::vector<std::byte> bytes_;  // as many as were ever needed at once, so that adding a value fills none in
+  std::size_t used_ = 0;          // of bytes_
   std::vector<std::string_view> keys_;
   std::vector<Level> levels_;
 };
