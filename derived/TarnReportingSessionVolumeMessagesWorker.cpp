@@ -5,11 +5,11 @@
 
 #include "derived/TarnReportingMessageFields.h"
 #include "derived/TarnReportingSegments.h"
-#include "derived/TarnReportingSessionWorkerUtility.h"
 #include "service/TarnReportingLog.h"
 #include "service/TarnReportingUtility.h"
 #include "session/TarnReportingSession.h"
 #include "session/TarnReportingSessionKeys.h"
+#include "session/TarnReportingSessionWorkerUtility.h"
 
 namespace tarn {
 

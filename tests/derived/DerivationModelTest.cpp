@@ -9,9 +9,9 @@
 #include "derived/TarnReportingSessionInputMessagesWorker.h"
 #include "derived/TarnReportingSessionLagoonMessagesWorker.h"
 #include "derived/TarnReportingSessionVolumeMessagesWorker.h"
-#include "derived/TarnReportingSessionWorkerUtility.h"
 #include "platform/testing/FakePlatform.h"
 #include "service/TarnReportingLog.h"
+#include "session/TarnReportingSessionWorkerUtility.h"
 #include "tests/derived/DerivationModels.h"
 #include "tests/derived/DerivedMessages.h"
 

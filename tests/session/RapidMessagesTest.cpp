@@ -4,7 +4,7 @@
 #include <limits>
 #include <vector>
 
-#include "derived/TarnReportingSessionWorkerUtility.h"
+#include "session/TarnReportingSessionWorkerUtility.h"
 #include "tests/derived/DerivedMessages.h"
 
 namespace tarn {

@@ -1,4 +1,4 @@
-#include "derived/TarnReportingSessionWorkerUtility.h"
+#include "session/TarnReportingSessionWorkerUtility.h"
 
 #include <algorithm>
 #include <mutex>
