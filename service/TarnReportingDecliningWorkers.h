@@ -74,12 +74,6 @@ class TarnReportingSessionDPWorker : public TarnReportingDecliningConsumer<TarnR
   static constexpr std::string_view kClassName = "TarnReportingSessionDPWorker";
 };
 
-class TarnReportingSessionAudioRegistrationWorker
-    : public TarnReportingDecliningConsumer<TarnReportingSessionAudioRegistrationWorker> {
- public:
-  static constexpr std::string_view kClassName = "TarnReportingSessionAudioRegistrationWorker";
-};
-
 class TarnReportingSessionRtcWorker : public TarnReportingDecliningConsumer<TarnReportingSessionRtcWorker> {
  public:
   static constexpr std::string_view kClassName = "TarnReportingSessionRtcWorker";

@@ -11,6 +11,7 @@
 #include "service/TarnReportingDecliningWorkers.h"
 #include "session/TarnReportingSessionSummaryWorker.h"
 #include "session/TarnReportingSessionTallyWorker.h"
+#include "telemetry/TarnReportingSessionAudioRegistrationWorker.h"
 
 namespace tarn {
 

@@ -2,10 +2,9 @@
 
 #include <gtest/gtest.h>
 
-#include <cstdlib>
 #include <limits>
-#include <optional>
-#include <string>
+
+#include "tests/linux/TimeZoneGuard.h"
 
 namespace tarn::linux_host {
 namespace {
@@ -13,24 +12,13 @@ namespace {
 // Puts the process into a time zone that is written out, so that no zone files are needed.
 class LinuxLocalCalendarTest : public testing::Test {
  protected:
-  LinuxLocalCalendarTest() {
-    if (const char* zone = std::getenv("TZ")) before_ = zone;
-  }
-  ~LinuxLocalCalendarTest() override {
-    if (before_) {
-      ::setenv("TZ", before_->c_str(), 1);
-    } else {
-      ::unsetenv("TZ");
-    }
-    ::tzset();
-  }
   static LinuxLocalCalendar calendarIn(const char* zone) {
-    ::setenv("TZ", zone, 1);
+    TimeZoneGuard::set(zone);
     return {};
   }
 
  private:
-  std::optional<std::string> before_;
+  const TimeZoneGuard before_;
 };
 
 constexpr const char* kBerlin = "CET-1CEST,M3.5.0,M10.5.0/3";

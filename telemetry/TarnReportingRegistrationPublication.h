@@ -1,0 +1,49 @@
+// TarnReportingRegistrationPublication: a back-end session of the registration's own, and the records that are sent
+// through it once a backend is found.
+//
+// Owner: the worker that began it, and the back-end's completion while that is awaited; so the records are sent even
+// when the worker has gone. Threads: begin() on the server queue, the completion on the back-end's thread.
+#pragma once
+
+#include <atomic>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "plist/Dictionary.h"
+
+namespace tarn {
+
+namespace platform {
+class RtcReportingSession;
+}
+class TarnReportingRegistrationState;
+class TarnReportingSession;
+class TarnReportingSessionMessage;
+
+class TarnReportingRegistrationPublication : public std::enable_shared_from_this<TarnReportingRegistrationPublication> {
+ public:
+  TarnReportingRegistrationPublication(std::shared_ptr<TarnReportingRegistrationState> state,
+                                       std::vector<plist::Dictionary> records);
+  ~TarnReportingRegistrationPublication();
+  TarnReportingRegistrationPublication(const TarnReportingRegistrationPublication&) = delete;
+  TarnReportingRegistrationPublication& operator=(const TarnReportingRegistrationPublication&) = delete;
+
+  // Opens the back-end session under the token and has it look for backends. Nothing comes of it when there is no
+  // session to be had.
+  void begin(const TarnReportingSession& session, const std::string& hierarchyToken);
+  // Whether backends were found.
+  bool started() const noexcept { return started_; }
+
+ private:
+  void sendRecords();
+  // One that is refused with an error is logged. One that is sent puts the next publication off by a week.
+  void sendMessage(const TarnReportingSessionMessage& message);
+
+  const std::shared_ptr<TarnReportingRegistrationState> state_;
+  const std::vector<plist::Dictionary> records_;
+  std::shared_ptr<platform::RtcReportingSession> rtcReportingSession_;  // set before the completion can come
+  std::atomic<bool> started_{false};
+};
+
+}  // namespace tarn

@@ -1,0 +1,23 @@
+// The accessory registration, which declines every session.
+#include <gtest/gtest.h>
+
+#include "tests/e2e/ServiceFixture.h"
+
+namespace tarn::e2e {
+namespace {
+
+class Registration : public ServiceFixture {};
+
+TEST_F(Registration, DeclinesASessionAndSaysSo) {
+  ASSERT_TRUE(startService({"--log-level", "debug"}));
+  play(R"({"op":"createReportingSession","reporterID":1}
+{"op":"startReportingSessionForID","reporterID":1}
+{"op":"stopReportingSessionForID","reporterID":1}
+)");
+  EXPECT_TRUE(logSays(" debug tarnrz TarnReportingSessionAudioRegistrationWorker:"));
+  EXPECT_TRUE(logSays(" TarnReportingSessionAudioRegistrationWorker unsupported\n"));
+  EXPECT_TRUE(logSays("action=failure worker=TarnReportingSessionAudioRegistrationWorker reporterID=1"));
+}
+
+}  // namespace
+}  // namespace tarn::e2e
