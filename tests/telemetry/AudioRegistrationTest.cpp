@@ -402,8 +402,8 @@ TEST_F(AudioRegistration, CompletionOnAnotherThreadMeetsTheWorkersEnd) {
     handle(kBuds);
     worker_->stop();
     worker_.reset();
+    platform_.rtcReporting.completions().joinThreads();  // before the next round sets what it stores
   }
-  platform_.rtcReporting.completions().joinThreads();
   for (const auto& backend : backendSessions()) {
     EXPECT_EQ(backend.messages.size(), 1U);
   }
