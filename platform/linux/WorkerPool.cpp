@@ -1,5 +1,9 @@
 #include "platform/linux/WorkerPool.h"
 
+#include <cstdio>
+#include <cstdlib>
+#include <system_error>
+
 #include "platform/linux/CurrentQueue.h"
 
 namespace tarn::linux_host {
@@ -11,6 +15,12 @@ constexpr int kPiecesPerTurn = 64;
 // The longest sleep: a bound that keeps the arithmetic of the system's timed waits in range.
 constexpr std::chrono::nanoseconds kLongestSleep = std::chrono::hours(1);
 
+// Work that is handed over must run; without a thread for it the process is of no use.
+[[noreturn]] void endForWantOfThreads() {
+  static_cast<void>(std::fputs("thread constructor failed\n", stderr));
+  std::abort();
+}
+
 }  // namespace
 
 void WorkerPool::start(std::size_t threads) {
@@ -18,8 +28,12 @@ void WorkerPool::start(std::size_t threads) {
   if (!threads_.empty() || stopping_) {
     return;
   }
-  for (std::size_t i = 0; i < threads; ++i) {
-    threads_.emplace_back([this] { serve(); });
+  try {
+    for (std::size_t i = 0; i < threads; ++i) {
+      threads_.emplace_back([this] { serve(); });
+    }
+  } catch (const std::system_error&) {
+    endForWantOfThreads();
   }
 }
 

@@ -39,7 +39,7 @@ class WorkerPool {
   WorkerPool& operator=(const WorkerPool&) = delete;
   ~WorkerPool() { stop(); }
 
-  // Starts the threads, once; later calls do nothing.
+  // Starts the threads, once; later calls do nothing. A system that has no more threads to give ends the process.
   void start(std::size_t threads);
   // Runs what is ready, then ends the threads. Delayed work whose moment has not come is not run, nor is what comes
   // later.

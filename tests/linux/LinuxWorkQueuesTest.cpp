@@ -1,6 +1,7 @@
 #include "platform/linux/LinuxWorkQueues.h"
 
 #include <gtest/gtest.h>
+#include <pthread.h>
 
 #include <atomic>
 #include <future>
@@ -125,6 +126,18 @@ TEST_F(LinuxWorkQueuesTest, TheEndRunsWhatIsReady) {
     }
   }
   EXPECT_EQ(ran, 500);
+}
+
+TEST_F(LinuxWorkQueuesTest, ASystemWithoutThreadsToGiveEndsTheProcess) {
+  const auto askForOne = [this] {
+    // No address space holds stacks of this size.
+    pthread_attr_t attributes;
+    ::pthread_attr_init(&attributes);
+    ::pthread_attr_setstacksize(&attributes, std::size_t{1} << 60U);
+    ::pthread_setattr_default_np(&attributes);
+    static_cast<void>(make());
+  };
+  EXPECT_DEATH(askForOne(), "thread constructor failed");
 }
 
 }  // namespace
