@@ -41,7 +41,9 @@
 #include "platform/linux/StateFolder.h"
 #include "platform/linux/Watchdog.h"
 #include "platform/recorder/Recorder.h"
+#include "platform/recorder/RecorderGyreService.h"
 #include "platform/recorder/RecorderTallyService.h"
+#include "platform/recorder/RecorderTattleService.h"
 #include "service/TarnReportingPlatform.h"
 #include "service/TarnReportingService.h"
 #include "service/TarnReportingWorkerClasses.h"
@@ -97,6 +99,8 @@ class Host final : public platform::ProcessControl {
         recorder_(recorderOptionsOf(setup), log, clock),
         tally_(recorder_, clock, setup.configuration.tally.inUse),
         workQueues_(clock, loop_.queue()),
+        tattle_(recorder_, clock, workQueues_),
+        gyre_(recorder_, clock),
         conditions_(clock, loop_.queue(), loop_.progress()),
         defaults_(setup.options.stateDirectory + "/defaults", log),
         notifications_(setup.options.stateDirectory + "/notifications", log),
@@ -177,6 +181,8 @@ class Host final : public platform::ProcessControl {
   recorder::Recorder recorder_;
   recorder::RecorderTallyService tally_;
   LinuxWorkQueues workQueues_;
+  recorder::RecorderTattleService tattle_;
+  recorder::RecorderGyreService gyre_;
   LinuxConditions conditions_;
   LinuxTracePoints tracePoints_;
   JsonDefaultsStore defaults_;
@@ -208,7 +214,9 @@ class Host final : public platform::ProcessControl {
                                          .localCalendar = localCalendar_,
                                          .randomSource = randomSource_,
                                          .processEnvironment = processEnvironment_,
-                                         .commandRunner = commandRunner_};
+                                         .commandRunner = commandRunner_,
+                                         .tattle = &tattle_,
+                                         .gyre = &gyre_};
 };
 
 // The listening socket: the one handed over, else the right to the one named.

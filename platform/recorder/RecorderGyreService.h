@@ -1,0 +1,26 @@
+// RecorderGyreService: the stack-sampling service as the recorder stands in for it: requests are recorded under
+// back-end "gyre".
+//
+// Owner: the entry point. Threads: the server queue.
+#pragma once
+
+#include "platform/Clock.h"
+#include "platform/GyreService.h"
+
+namespace tarn::recorder {
+
+class Recorder;
+
+class RecorderGyreService : public platform::GyreService {
+ public:
+  // Both outlive this.
+  RecorderGyreService(Recorder& recorder, const platform::Clock& clock) : recorder_(recorder), clock_(clock) {}
+
+  void requestGyre(const platform::GyreRequest& request) override;
+
+ private:
+  Recorder& recorder_;
+  const platform::Clock& clock_;
+};
+
+}  // namespace tarn::recorder

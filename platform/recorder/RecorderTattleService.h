@@ -1,0 +1,36 @@
+// RecorderTattleService: the bug-filing prompt as the recorder stands in for it: drafts are recorded under back-end
+// "tattle". There is nobody to ask, so every draft counts as taken.
+//
+// Owner: the entry point. Threads: requests on the server queue; completions on a queue of its own.
+#pragma once
+
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "platform/Clock.h"
+#include "platform/TattleService.h"
+#include "platform/WorkQueue.h"
+
+namespace tarn::recorder {
+
+class Recorder;
+
+class RecorderTattleService : public platform::TattleService {
+ public:
+  // All outlive this.
+  RecorderTattleService(Recorder& recorder, const platform::Clock& clock, platform::WorkQueues& workQueues)
+      : recorder_(recorder), clock_(clock), workQueues_(workQueues) {}
+
+  void createDraft(const platform::TattleDraft& draft, const std::optional<std::string>& processName,
+                   std::string_view displayReason, Completion completion) override;
+
+ private:
+  Recorder& recorder_;
+  const platform::Clock& clock_;
+  platform::WorkQueues& workQueues_;
+  std::shared_ptr<platform::WorkQueue> completions_;  // made with the first draft: most devices never see one
+};
+
+}  // namespace tarn::recorder
