@@ -80,10 +80,4 @@ class TarnReportingSessionRtcWorker : public TarnReportingDecliningConsumer<Tarn
   static bool handleSingleMessageSession() { return true; }
 };
 
-class TarnReportingSessionTattleWorker : public TarnReportingDecliningConsumer<TarnReportingSessionTattleWorker> {
- public:
-  static constexpr std::string_view kClassName = "TarnReportingSessionTattleWorker";
-  static bool handleSingleMessageSession() { return true; }
-};
-
 }  // namespace tarn
