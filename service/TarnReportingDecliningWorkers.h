@@ -69,11 +69,6 @@ class TarnReportingSessionSnareWorker : public TarnReportingDecliningConsumer<Ta
   static bool handleSingleMessageSession() { return true; }
 };
 
-class TarnReportingSessionDPWorker : public TarnReportingDecliningConsumer<TarnReportingSessionDPWorker> {
- public:
-  static constexpr std::string_view kClassName = "TarnReportingSessionDPWorker";
-};
-
 class TarnReportingSessionRtcWorker : public TarnReportingDecliningConsumer<TarnReportingSessionRtcWorker> {
  public:
   static constexpr std::string_view kClassName = "TarnReportingSessionRtcWorker";

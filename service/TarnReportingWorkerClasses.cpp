@@ -8,6 +8,7 @@
 #include "derived/TarnReportingSessionSummaryJsonFileWorker.h"
 #include "derived/TarnReportingSessionSystemMonitorWorker.h"
 #include "derived/TarnReportingSessionVolumeMessagesWorker.h"
+#include "diagnostics/TarnReportingSessionDPWorker.h"
 #include "diagnostics/TarnReportingSessionTattleWorker.h"
 #include "service/TarnReportingDecliningWorkers.h"
 #include "session/TarnReportingSessionSummaryWorker.h"
