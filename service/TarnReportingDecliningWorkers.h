@@ -44,12 +44,6 @@ class TarnReportingSessionWattlogWorker : public TarnReportingDecliningConsumer<
   static bool handleSingleMessageSession() { return true; }
 };
 
-class TarnReportingSessionMemoryLogWorker : public TarnReportingDecliningConsumer<TarnReportingSessionMemoryLogWorker> {
- public:
-  static constexpr std::string_view kClassName = "TarnReportingSessionMemoryLogWorker";
-  static bool startOnInit() { return true; }
-};
-
 class TarnReportingSessionPylonWorker : public TarnReportingDecliningConsumer<TarnReportingSessionPylonWorker> {
  public:
   static constexpr std::string_view kClassName = "TarnReportingSessionPylonWorker";

@@ -9,6 +9,7 @@
 #include "derived/TarnReportingSessionSystemMonitorWorker.h"
 #include "derived/TarnReportingSessionVolumeMessagesWorker.h"
 #include "diagnostics/TarnReportingSessionDPWorker.h"
+#include "diagnostics/TarnReportingSessionMemoryLogWorker.h"
 #include "diagnostics/TarnReportingSessionTattleWorker.h"
 #include "service/TarnReportingDecliningWorkers.h"
 #include "session/TarnReportingSessionSummaryWorker.h"

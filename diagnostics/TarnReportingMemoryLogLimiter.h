@@ -1,0 +1,36 @@
+// TarnReportingMemoryLogLimiter: lets a memory log through once in 5 seconds.
+//
+// The tools that make one are a burden to a device that is short of memory already. One limiter serves all sessions.
+// Threads: any.
+#pragma once
+
+#include <chrono>
+#include <mutex>
+#include <optional>
+
+namespace tarn {
+
+class TarnReportingMemoryLogLimiter {
+ public:
+  static constexpr std::chrono::nanoseconds kInterval = std::chrono::seconds(5);
+
+  TarnReportingMemoryLogLimiter() = default;
+  TarnReportingMemoryLogLimiter(const TarnReportingMemoryLogLimiter&) = delete;
+  TarnReportingMemoryLogLimiter& operator=(const TarnReportingMemoryLogLimiter&) = delete;
+
+  // Whether a log may be made now, on the monotonic clock; a yes begins the interval anew. The first is always a yes.
+  bool claim(std::chrono::nanoseconds now) {
+    const std::lock_guard lock(mutex_);
+    if (lastRun_ && now - *lastRun_ <= kInterval) {
+      return false;
+    }
+    lastRun_ = now;
+    return true;
+  }
+
+ private:
+  std::mutex mutex_;
+  std::optional<std::chrono::nanoseconds> lastRun_;  // guarded by mutex_
+};
+
+}  // namespace tarn

@@ -1,0 +1,195 @@
+#include "diagnostics/TarnReportingSessionMemoryLogWorker.h"
+
+#include <algorithm>
+#include <array>
+#include <mutex>
+#include <string>
+#include <utility>
+
+#include "diagnostics/TarnReportingMemoryLogLimiter.h"
+#include "platform/Clock.h"
+#include "platform/CommandRunner.h"
+#include "platform/Condition.h"
+#include "platform/Facilities.h"
+#include "platform/WorkQueue.h"
+#include "service/TarnReportingLog.h"
+#include "service/TarnReportingPlatform.h"
+#include "service/TarnReportingUtility.h"
+#include "session/TarnReportingSession.h"
+#include "session/TarnReportingSessionMessage.h"
+
+namespace tarn {
+
+namespace {
+
+using Worker = TarnReportingSessionMemoryLogWorker;
+
+constexpr std::string_view kTag = "wiredlog:";
+constexpr std::size_t kLineBytes = 2047;
+constexpr std::size_t kBlockBytes = 512;
+
+bool holds(std::string_view line, std::string_view part) {
+  return line.find(part) != std::string_view::npos;
+}
+
+// Of the resources of each task those that tell about memory and time, without the tasks that wire nothing.
+bool isResourceLine(std::string_view line) {
+  if (holds(line, " wired_mem ")) {
+    return !holds(line, "wired_mem          0           0           0        none");
+  }
+  constexpr std::array<std::string_view, 4> kWanted{" cpu_time ", " phys_mem ", " phys_footprint ", "RESOURCE"};
+  return std::any_of(kWanted.begin(), kWanted.end(), [line](std::string_view part) { return holds(line, part); });
+}
+
+struct Tool {
+  std::string_view command;
+  std::string_view queueName;
+  bool (*keeps)(std::string_view line);
+};
+
+constexpr Tool kResources{"/usr/local/bin/restop", "sys.oxbow.tarnkit.reporting.memorylog.resources", isResourceLine};
+constexpr Tool kZones{"/usr/bin/zonetally -l", "sys.oxbow.tarnkit.reporting.memorylog.zones",
+                      [](std::string_view) { return true; }};
+
+TarnReportingMemoryLogLimiter& limiter() {
+  static TarnReportingMemoryLogLimiter instance;
+  return instance;
+}
+
+// These lines are read by programs that look for the tag at their beginning: no module stands before it.
+template <class... Arguments>
+void log(const LogText& text, const Arguments&... arguments) {
+  TarnReportingLogPlain(TarnReportingSessionCategory(), LogLevel::Error, text, arguments...);
+}
+
+struct Output {
+  std::string kept;
+  bool none = true;  // nothing was read
+  bool cut = false;  // there was more
+};
+
+Output readOutput(platform::RunningCommand& running, const Tool& tool) {
+  Output output;
+  std::size_t bytesRead = 0;
+  while (const auto line = running.readLine(kLineBytes)) {
+    if (bytesRead >= Worker::kMostBytesRead || output.kept.size() >= Worker::kMostBytesKept) {
+      output.cut = true;
+      break;
+    }
+    bytesRead += line->size();
+    output.none = false;
+    if (tool.keeps(*line)) {
+      output.kept.append(kTag).append(1, ' ').append(*line);
+    }
+  }
+  return output;
+}
+
+// The shell starts whether or not there is such a tool, and tells by its exit status that there is none.
+bool wasNotExecuted(const platform::CommandEnd& end) {
+  return end.kind == platform::CommandEnd::Kind::Exited &&
+         (end.status == platform::CommandEnd::kNotExecutable || end.status == platform::CommandEnd::kNotFound);
+}
+
+// Runs the tool to its end; what it printed, as far as it is wanted.
+std::string runTool(const Tool& tool) {
+  log("%s requesting '%s'", kTag, tool.command);
+  const auto started = TarnReportingFacilities().commandRunner.start(tool.command, Worker::kToolTimeLimit);
+  if (started.failed()) {
+    log("%s unable to execute '%s'", kTag, tool.command);
+    return {};
+  }
+  Output output = readOutput(*started.value, tool);
+  const platform::CommandEnd end = started.value->close();
+  if (output.none && wasNotExecuted(end)) {
+    log("%s unable to execute '%s'", kTag, tool.command);
+    return {};
+  }
+  if (output.cut) {
+    log("%s output of '%s' cut", kTag, tool.command);
+  }
+  log("%s request %s captured", kTag, tool.command);
+  return std::move(output.kept);
+}
+
+// A tool on its way, shared by its thread and the one that waits.
+struct ToolRun {
+  const std::shared_ptr<platform::Condition> condition = TarnReportingFacilities().conditions.makeCondition();
+  bool finished = false;  // guarded by the condition, as the text
+  std::string text;
+};
+
+std::shared_ptr<ToolRun> startTool(const Tool& tool) {
+  auto run = std::make_shared<ToolRun>();
+  TarnReportingFacilities()
+      .workQueues.makeSerialQueue(tool.queueName, platform::QualityOfService::UserInitiated)
+      ->async([run, &tool] {
+        std::string text = runTool(tool);
+        const std::lock_guard lock(*run->condition);
+        run->text = std::move(text);
+        run->finished = true;
+        run->condition->signal();
+      });
+  return run;
+}
+
+// Waits until `deadline` on the monotonic clock.
+std::string textOf(ToolRun& run, const Tool& tool, std::chrono::nanoseconds deadline) {
+  const platform::Clock& clock = TarnReportingFacilities().clock;
+  const std::lock_guard lock(*run.condition);
+  for (auto left = deadline - clock.monotonic(); !run.finished && left > std::chrono::nanoseconds::zero();
+       left = deadline - clock.monotonic()) {
+    if (!run.condition->waitFor(left)) {
+      break;
+    }
+  }
+  if (!run.finished) {
+    log("%s gave up waiting for '%s'", kTag, tool.command);
+  }
+  return std::move(run.text);
+}
+
+// How long the next block is: it ends with the first line that ends behind the least size.
+std::size_t blockLength(std::string_view text) {
+  if (text.size() < kBlockBytes) {
+    return text.size();
+  }
+  const std::size_t newline = text.find('\n', kBlockBytes);
+  return newline == std::string_view::npos ? kBlockBytes : newline + 1;
+}
+
+// A log takes entries of limited size only, so a long text goes there in pieces.
+void logInBlocks(std::string_view text) {
+  for (std::size_t number = 1; !text.empty(); ++number) {
+    const std::size_t length = blockLength(text);
+    log("WIRED LOG BLOCK %zu\n%s", number, text.substr(0, length));
+    text.remove_prefix(length);
+  }
+}
+
+}  // namespace
+
+std::unique_ptr<TarnReportingSessionMemoryLogWorker> TarnReportingSessionMemoryLogWorker::initWithSession(
+    const std::shared_ptr<TarnReportingSession>& session) {
+  if (session->serviceType() != AudioServiceType::Test && !TarnReportingUtilityIsInternalBuild()) {
+    return nullptr;
+  }
+  return std::make_unique<TarnReportingSessionMemoryLogWorker>(session);
+}
+
+void TarnReportingSessionMemoryLogWorker::handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) {
+  if (message->type() != AudioEventType::MemoryLog) {
+    return;
+  }
+  const platform::Clock& clock = TarnReportingFacilities().clock;
+  if (!limiter().claim(clock.monotonic())) {
+    return;
+  }
+  const auto zones = startTool(kZones);
+  const auto resources = startTool(kResources);
+  const auto deadline = clock.monotonic() + kPatience;
+  logInBlocks(textOf(*zones, kZones, deadline));
+  logInBlocks(textOf(*resources, kResources, deadline));
+}
+
+}  // namespace tarn
