@@ -5,6 +5,7 @@
 // is gone. A well-behaved service replies once to an accepted request; a handler must bear more replies and none.
 #pragma once
 
+#include <array>
 #include <cstdint>
 #include <memory>
 #include <optional>
@@ -57,6 +58,17 @@ enum class SnareReason : std::int32_t {
   SessionNotFound,
   RequestThrottled,
 };
+// Their names, by their numbers.
+inline constexpr std::array<std::string_view, 10> kSnareReasonNames{"None",
+                                                                    "ServiceNotReady",
+                                                                    "NotSupported",
+                                                                    "ServiceUnavailable",
+                                                                    "ServiceInterrupted",
+                                                                    "InvalidParameters",
+                                                                    "DailyLimitExceeded",
+                                                                    "RandomizedSuppression",
+                                                                    "SessionNotFound",
+                                                                    "RequestThrottled"};
 
 // What a reporter is asked for. `event`, `events` and `actions` of the service are none in all of our requests.
 struct SnareRequest {
@@ -84,7 +96,7 @@ class SnareReporter {
 class SnareService {
  public:
   virtual ~SnareService() = default;
-  // A new reporter. A request lives on when its reporter is gone.
+  // A new reporter, never null. A request lives on when its reporter is gone.
   virtual std::shared_ptr<SnareReporter> createReporter() = 0;
 };
 

@@ -1,5 +1,6 @@
 #include "platform/linux/HostConfiguration.h"
 
+#include <algorithm>
 #include <array>
 #include <concepts>
 
@@ -39,6 +40,20 @@ Complaint take(const toml::node& node, std::string& setting) {
   const auto value = node.value_exact<std::string>();
   setting = value.value_or(setting);
   return value ? "" : "must be a text";
+}
+
+Complaint take(const toml::node& node, std::optional<platform::SnareReason>& reason) {
+  constexpr auto& kNames = platform::kSnareReasonNames;
+  std::string name;
+  if (Complaint complaint = take(node, name); !complaint.empty()) {
+    return complaint;
+  }
+  const auto* const found = std::find(kNames.begin(), kNames.end(), name);
+  if (found == kNames.end()) {
+    return name.empty() ? "" : "must be the name of a reason code, or empty";
+  }
+  reason = static_cast<platform::SnareReason>(found - kNames.begin());
+  return "";
 }
 
 Complaint take(const toml::node& node, std::optional<std::string>& folder) {

@@ -9,6 +9,8 @@
 #include <string_view>
 #include <vector>
 
+#include "platform/SnareService.h"
+
 namespace tarn::linux_host {
 
 struct HostConfiguration {
@@ -22,7 +24,7 @@ struct HostConfiguration {
     std::chrono::milliseconds startDelay{0};        // how late the start completion comes; at most an hour
   };
   struct Snare {
-    std::string refuse;  // the name of the reason code with which bug captures are refused; empty: they aren't
+    std::optional<platform::SnareReason> refuse;  // with what bug captures are refused; empty in the file: they aren't
   };
   struct Paths {
     std::optional<std::string> diagnosticLogs;  // the folder that holds DiagnosticLogs/; else the state directory

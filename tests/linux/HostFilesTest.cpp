@@ -23,7 +23,7 @@ TEST(HostConfiguration, EmptyFileHasEveryDefault) {
   EXPECT_FALSE(host.rtc.noBackends);
   EXPECT_TRUE(host.rtc.available);
   EXPECT_EQ(host.rtc.startDelay.count(), 0);
-  EXPECT_EQ(host.snare.refuse, "");
+  EXPECT_FALSE(host.snare.refuse);
   EXPECT_FALSE(host.paths.diagnosticLogs);
   EXPECT_FALSE(host.paths.flume);
   EXPECT_EQ(host.recorder.maximumMegabytes, 256U);
@@ -41,7 +41,7 @@ no_backends = true
 available = false
 start_delay_ms = 1500
 [snare]
-refuse = "someReason"
+refuse = "DailyLimitExceeded"
 [paths]
 diagnostic_logs = "/var/log/audio"
 flume = "/run/flume"
@@ -59,7 +59,7 @@ max_frame_bytes = 65536
   EXPECT_TRUE(host.rtc.noBackends);
   EXPECT_FALSE(host.rtc.available);
   EXPECT_EQ(host.rtc.startDelay, std::chrono::milliseconds(1500));
-  EXPECT_EQ(host.snare.refuse, "someReason");
+  EXPECT_EQ(host.snare.refuse, platform::SnareReason::DailyLimitExceeded);
   EXPECT_EQ(host.paths.diagnosticLogs, "/var/log/audio");
   EXPECT_EQ(host.paths.flume, "/run/flume");
   EXPECT_EQ(host.recorder.maximumMegabytes, 1U);
@@ -91,6 +91,22 @@ TEST(HostConfiguration, WrongTypesAreErrorsWithTheirLine) {
             "c.toml:2: \"paths.diagnostic_logs\" must be a folder's path");
   EXPECT_EQ(errorOf("[recorder]\nmax_megabytes = 1.0\n"),
             "c.toml:2: \"recorder.max_megabytes\" must be a whole number from 1 to 1048576");
+}
+
+TEST(HostConfiguration, ARefusalIsTheNameOfAReasonCode) {
+  for (std::size_t code = 0; code < platform::kSnareReasonNames.size(); ++code) {
+    const std::string name(platform::kSnareReasonNames[code]);
+    const ReadConfiguration read = parseConfiguration("[snare]\nrefuse = \"" + name + "\"\n", "c.toml");
+    ASSERT_TRUE(read.configuration) << read.error;
+    EXPECT_EQ(read.configuration->snare.refuse, static_cast<platform::SnareReason>(code)) << name;
+  }
+  const ReadConfiguration none = parseConfiguration("[snare]\nrefuse = \"\"\n", "c.toml");
+  ASSERT_TRUE(none.configuration) << none.error;
+  EXPECT_FALSE(none.configuration->snare.refuse);
+  for (const char* wrong : {"dailylimitexceeded", "DailyLimitExceeded ", "6", "kAilmentErrorNone"}) {
+    EXPECT_EQ(errorOf("\n[snare]\nrefuse = \"" + std::string(wrong) + "\"\n"),
+              "c.toml:3: \"snare.refuse\" must be the name of a reason code, or empty");
+  }
 }
 
 TEST(HostConfiguration, NumbersAreReadToTheirLimitsAndRefusedBehindThem) {
