@@ -1,0 +1,47 @@
+// RecorderSnareService: the bug-capture service as the recorder stands in for it. Requests and cancels are recorded
+// under back-end "snare" when they are made; the replies come on a thread of the service's own.
+//
+// Each request is answered with a fresh session identifier, or, when the configuration wants refusals, with no success
+// and that reason. A request that is answered with a refusal was taken all the same, so it is recorded like any other.
+// One that can't be answered, because too many wait for their reply or no thread can be made, is not accepted: not
+// recorded, and its handler is dropped.
+//
+// Owner: the entry point. Threads: requests on any; handlers on the service's thread, which is made by the first
+// request. The destructor waits for the handler that runs and drops the replies that wait. Reporters may outlive the
+// service: then they accept nothing and record nothing.
+#pragma once
+
+#include <cstddef>
+#include <memory>
+#include <optional>
+
+#include "platform/Clock.h"
+#include "platform/RandomSource.h"
+#include "platform/SnareService.h"
+
+namespace tarn::recorder {
+
+class Recorder;
+
+class RecorderSnareService : public platform::SnareService {
+ public:
+  // Replies that may wait at once. They wait for a few log lines each, so this is far more than there ever are.
+  static constexpr std::size_t kMostWaitingReplies = 1024;
+
+  // `refuse`: the reason with which all requests are refused. The others outlive this.
+  RecorderSnareService(Recorder& recorder, const platform::Clock& clock, platform::RandomSource& randomSource,
+                       std::optional<platform::SnareReason> refuse);
+  ~RecorderSnareService() override;
+  RecorderSnareService(const RecorderSnareService&) = delete;
+  RecorderSnareService& operator=(const RecorderSnareService&) = delete;
+
+  std::shared_ptr<platform::SnareReporter> createReporter() override;
+
+ private:
+  class Desk;
+  class Reporter;
+
+  const std::shared_ptr<Desk> desk_;
+};
+
+}  // namespace tarn::recorder
