@@ -57,12 +57,6 @@ class TarnReportingSessionDriverSnapshotWorker
   static constexpr std::string_view kClassName = "TarnReportingSessionDriverSnapshotWorker";
 };
 
-class TarnReportingSessionSnareWorker : public TarnReportingDecliningConsumer<TarnReportingSessionSnareWorker> {
- public:
-  static constexpr std::string_view kClassName = "TarnReportingSessionSnareWorker";
-  static bool handleSingleMessageSession() { return true; }
-};
-
 class TarnReportingSessionRtcWorker : public TarnReportingDecliningConsumer<TarnReportingSessionRtcWorker> {
  public:
   static constexpr std::string_view kClassName = "TarnReportingSessionRtcWorker";

@@ -11,6 +11,7 @@
 #include "diagnostics/TarnReportingSessionDPWorker.h"
 #include "diagnostics/TarnReportingSessionMemoryLogWorker.h"
 #include "diagnostics/TarnReportingSessionTattleWorker.h"
+#include "diagnostics/TarnReportingSessionSnareWorker.h"
 #include "service/TarnReportingDecliningWorkers.h"
 #include "session/TarnReportingSessionSummaryWorker.h"
 #include "session/TarnReportingSessionTallyWorker.h"

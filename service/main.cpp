@@ -42,6 +42,7 @@
 #include "platform/linux/Watchdog.h"
 #include "platform/recorder/Recorder.h"
 #include "platform/recorder/RecorderGyreService.h"
+#include "platform/recorder/RecorderSnareService.h"
 #include "platform/recorder/RecorderTallyService.h"
 #include "platform/recorder/RecorderTattleService.h"
 #include "service/TarnReportingPlatform.h"
@@ -98,6 +99,7 @@ class Host final : public platform::ProcessControl {
         connections_(loop_, log, limitsOf(setup.configuration)),
         recorder_(recorderOptionsOf(setup), log, clock),
         tally_(recorder_, clock, setup.configuration.tally.inUse),
+        snare_(recorder_, clock, randomSource_, setup.configuration.snare.refuse),
         workQueues_(clock, loop_.queue()),
         tattle_(recorder_, clock, workQueues_),
         gyre_(recorder_, clock),
@@ -180,6 +182,8 @@ class Host final : public platform::ProcessControl {
   ConnectionHost connections_;
   recorder::Recorder recorder_;
   recorder::RecorderTallyService tally_;
+  LinuxRandomSource randomSource_;
+  recorder::RecorderSnareService snare_;
   LinuxWorkQueues workQueues_;
   recorder::RecorderTattleService tattle_;
   recorder::RecorderGyreService gyre_;
@@ -190,7 +194,6 @@ class Host final : public platform::ProcessControl {
   LinuxProcessFacts processFacts_;
   LinuxFileSystem fileSystem_;
   LinuxLocalCalendar localCalendar_;
-  LinuxRandomSource randomSource_;
   LinuxProcessEnvironment processEnvironment_;
   LinuxCommandRunner commandRunner_;
   JsonDeviceProperties deviceProperties_;
@@ -215,6 +218,7 @@ class Host final : public platform::ProcessControl {
                                          .randomSource = randomSource_,
                                          .processEnvironment = processEnvironment_,
                                          .commandRunner = commandRunner_,
+                                         .snare = &snare_,
                                          .tattle = &tattle_,
                                          .gyre = &gyre_};
 };

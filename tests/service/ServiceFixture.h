@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "derived/TarnReportingSystemMonitor.h"
+#include "diagnostics/TarnReportingSnareProcessState.h"
 #include "platform/testing/FakePlatform.h"
 #include "plist/Dictionary.h"
 #include "service/TarnReportingClientServerInstance.h"
@@ -52,6 +53,7 @@ class ServiceFixture : public ::testing::Test {
     platform_.workQueues.dropAll();
     service_.reset();
     TarnReportingSystemMonitor::reset();
+    TarnReportingSnareProcessState::reset();
     TarnReportingSession::setAllWorkerClasses({});
   }
 

@@ -1,0 +1,48 @@
+// TarnReportingSnareProcessState: what the Snare worker's fault detectors remember across sessions.
+//
+// Some faults show only over many short sessions, so their counts belong to the process. One shared instance: made by
+// the first Snare worker and kept until reset(). It holds as many states as there are detector classes that share one.
+//
+// Threads: any.
+#pragma once
+
+#include <map>
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <string_view>
+
+namespace tarn {
+
+struct WorkerInstanceState;
+
+class TarnReportingSnareProcessState {
+ public:
+  // When a detector fired last, whatever the session. Its holder keeps the lock for a whole fire.
+  struct RateLimit {
+    std::mutex lock;
+    std::optional<double> lastFire;  // epoch seconds; guarded by lock
+  };
+
+  // The shared instance; made when there is none.
+  static std::shared_ptr<TarnReportingSnareProcessState> shared();
+  // Drops the shared instance. Who holds a state of it keeps that; the next worker begins with fresh ones.
+  static void reset();
+
+  TarnReportingSnareProcessState() = default;
+  TarnReportingSnareProcessState(const TarnReportingSnareProcessState&) = delete;
+  TarnReportingSnareProcessState& operator=(const TarnReportingSnareProcessState&) = delete;
+
+  // The state of a detector class; made by `make` when there is none yet, else as it is. The name lives for ever.
+  std::shared_ptr<WorkerInstanceState> stateFor(std::string_view className,
+                                                std::shared_ptr<WorkerInstanceState> (*make)());
+  // Of the detector of stuck system sounds.
+  RateLimit& systemSoundRateLimit() noexcept { return systemSoundRateLimit_; }
+
+ private:
+  std::mutex mutex_;
+  std::map<std::string_view, std::shared_ptr<WorkerInstanceState>> states_;  // guarded by mutex_
+  RateLimit systemSoundRateLimit_;
+};
+
+}  // namespace tarn

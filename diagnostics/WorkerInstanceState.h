@@ -1,0 +1,91 @@
+// WorkerInstanceState: what one fault detector of the Snare worker has counted, when it may fire, and what came of it;
+// with the trigger rule as decisions that take the time.
+//
+// Thresholds: a count other than 0 alone decides; with a count of 0 the time since the first interesting message does.
+// As made, the thresholds are so high that nothing ever fires.
+//
+// Owner: the detector that made it, or the process (TarnReportingSnareProcessState) for those that share one across
+// sessions. Threads: the server queue, but for the two synchronised members: a reply of the capture service writes the
+// identifier on a thread of that service.
+#pragma once
+
+#include <cstdint>
+#include <limits>
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <string>
+#include <utility>
+
+#include "plist/Dictionary.h"
+
+namespace tarn {
+
+class TarnReportingSessionMessage;
+
+namespace platform {
+class SnareReporter;
+}
+
+// A value that may be missing, whole for whoever reads it while another thread writes it. Threads: any.
+template <class T>
+class TarnReportingSynchronized {
+ public:
+  TarnReportingSynchronized() = default;
+  TarnReportingSynchronized(const TarnReportingSynchronized&) = delete;
+  TarnReportingSynchronized& operator=(const TarnReportingSynchronized&) = delete;
+
+  std::optional<T> get() const {
+    const std::lock_guard guard(mutex_);
+    return value_;
+  }
+  void set(std::optional<T> value) {
+    const std::lock_guard guard(mutex_);
+    value_ = std::move(value);
+  }
+
+ private:
+  mutable std::mutex mutex_;
+  std::optional<T> value_;  // guarded by mutex_
+};
+
+// What the trigger rule says about an interesting message that has just been counted.
+enum class TarnReportingSnareVerdict {
+  Fire,
+  TooFew,       // fewer interesting messages than the threshold
+  TooSoon,      // no threshold of messages, and the time isn't over
+  FiredBefore,  // it fires once, and it did
+};
+
+struct WorkerInstanceState {
+  // A place of its own: a reply that comes when the session and this state are gone still has where to write.
+  using SnareSessionIdentifier = TarnReportingSynchronized<std::string>;
+
+  WorkerInstanceState();
+  ~WorkerInstanceState();
+  WorkerInstanceState(const WorkerInstanceState&) = delete;
+  WorkerInstanceState& operator=(const WorkerInstanceState&) = delete;
+
+  // Whether this payload says what the last interesting message said, time stamps included.
+  bool repeatsLastMessage(const plist::Dictionary& payload) const noexcept;
+  // Counts an interesting message at this time, in epoch seconds.
+  void count(double now);
+  // Whether the message that was counted last fires at this time, in epoch seconds.
+  TarnReportingSnareVerdict verdict(double now) const;
+  // Begins to count anew, as behind a fire. How often it fired is kept.
+  void reset();
+
+  // The capture that the service reported for the latest fire; never null.
+  const std::shared_ptr<SnareSessionIdentifier> currentSnareSessionIdentifier =
+      std::make_shared<SnareSessionIdentifier>();
+  std::uint64_t interestedCount = 0;  // since the last fire
+  std::uint64_t interestThresholdCount = std::numeric_limits<std::uint64_t>::max();
+  TarnReportingSynchronized<double> interestFirstSeen;  // epoch seconds, of the first since the last fire
+  double interestThresholdDurationSeconds = std::numeric_limits<double>::max();
+  bool oncePerSession = false;  // fires only while firedCount is 0
+  std::uint64_t firedCount = 0;
+  std::shared_ptr<const TarnReportingSessionMessage> lastMessage;  // a copy of the last interesting one since the fire
+  std::shared_ptr<platform::SnareReporter> symptomReporter;        // made for the latest fire
+};
+
+}  // namespace tarn
