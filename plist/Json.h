@@ -6,6 +6,7 @@
 // number that is not finite as the text "nan", "inf" or "-inf".
 #pragma once
 
+#include <optional>
 #include <string>
 #include <string_view>
 
@@ -21,5 +22,7 @@ void appendJsonText(std::string& out, std::string_view text);
 void appendEscapedControls(std::string& out, std::string_view text);
 // Appends the base64 form.
 void appendBase64(std::string& out, std::string_view bytes);
+// The bytes of a base64 text (RFC 4648, padded, no line breaks); nothing when it isn't one.
+std::optional<std::string> decodeBase64(std::string_view text);
 
 }  // namespace tarn::plist

@@ -6,6 +6,7 @@
 #include <nlohmann/json.hpp>
 
 #include "platform/linux/JsonValues.h"
+#include "plist/Json.h"
 #include "plist/PackedBuilder.h"
 
 namespace tarn::linux_host {
@@ -167,7 +168,7 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
     return add(plist::Date{seconds.asDouble()});
   }
   bool addData(const plist::ValueView& base64) {
-    const std::optional<std::string> bytes = base64.isText() ? decodeBase64(base64.text()) : std::nullopt;
+    const std::optional<std::string> bytes = base64.isText() ? plist::decodeBase64(base64.text()) : std::nullopt;
     if (!bytes) {
       return fail("$data wants a base64 text");
     }
@@ -218,31 +219,6 @@ JsonReading readJson(std::string_view text, std::size_t maximumNesting) {
   nlohmann::json::sax_parse(begin, end, &builder);
   builder.refuseNul();
   return builder.take();
-}
-
-std::optional<std::string> decodeBase64(std::string_view text) {
-  static constexpr std::string_view kAlphabet = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
-  if (text.size() % 4 != 0) {
-    return std::nullopt;
-  }
-  const std::size_t padding = text.ends_with("==") ? 2 : (text.ends_with('=') ? 1 : 0);
-  std::string bytes;
-  std::uint32_t bits = 0;
-  int held = 0;
-  for (const char c : text.substr(0, text.size() - padding)) {
-    const std::size_t digit = kAlphabet.find(c);
-    if (digit == std::string_view::npos) {
-      return std::nullopt;
-    }
-    bits = (bits << 6U) | static_cast<std::uint32_t>(digit);
-    held += 6;
-    if (held >= 8) {
-      held -= 8;
-      bytes.push_back(static_cast<char>((bits >> static_cast<unsigned>(held)) & 0xFFU));
-    }
-  }
-  const bool leftOver = (bits & ((1U << static_cast<unsigned>(held)) - 1U)) != 0;
-  return leftOver ? std::nullopt : std::optional(std::move(bytes));
 }
 
 }  // namespace tarn::linux_host

@@ -49,7 +49,4 @@ enum class JsonLayout {
 // text that is not UTF-8, a dictionary that would read as one of the $ forms, nesting beyond the limit.
 std::optional<std::string> jsonText(const plist::ValueView& value, JsonLayout layout = JsonLayout::OneLine);
 
-// The bytes of a base64 text (RFC 4648, padded, no line breaks); nothing when it isn't one.
-std::optional<std::string> decodeBase64(std::string_view text);
-
 }  // namespace tarn::linux_host
