@@ -6,6 +6,7 @@
 #include <cstdio>
 #include <string_view>
 
+#include "plist/Characters.h"
 #include "plist/Dictionary.h"
 #include "plist/Json.h"
 
@@ -16,45 +17,10 @@ namespace {
 constexpr std::string_view kOpening = "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist version=\"1.0\">\n";
 constexpr std::string_view kClosing = "</plist>\n";
 
-// Reads one character of UTF-8 off the front of `text`; nothing when it is malformed.
-std::optional<char32_t> takeCharacter(std::string_view& text) {
-  const auto lead = static_cast<unsigned char>(text.front());
-  const std::size_t length = lead < 0x80   ? 1
-                             : lead < 0xC2 ? 0
-                             : lead < 0xE0 ? 2
-                             : lead < 0xF0 ? 3
-                             : lead < 0xF5 ? 4
-                                           : 0;
-  if (length == 0 || length > text.size()) {
-    return std::nullopt;
-  }
-  constexpr unsigned char kLeadBits[] = {0, 0x7F, 0x1F, 0x0F, 0x07};
-  char32_t character = lead & kLeadBits[length];
-  for (std::size_t index = 1; index < length; ++index) {
-    const auto next = static_cast<unsigned char>(text[index]);
-    if ((next & 0xC0) != 0x80) {
-      return std::nullopt;
-    }
-    character = (character << 6) | (next & 0x3F);
-  }
-  constexpr char32_t kLeast[] = {0, 0, 0x80, 0x800, 0x10000};  // a longer form of a smaller character is malformed
-  if (character < kLeast[length]) {
-    return std::nullopt;
-  }
-  text.remove_prefix(length);
-  return character;
-}
-
-// Whether an XML document may hold the character at all; escaping doesn't help those that it may not.
-bool isXmlCharacter(char32_t character) {
-  return character == 0x9 || character == 0xA || character == 0xD || (character >= 0x20 && character <= 0xD7FF) ||
-         (character >= 0xE000 && character <= 0xFFFD) || (character >= 0x10000 && character <= 0x10FFFF);
-}
-
 bool isXmlText(std::string_view text) {
   while (!text.empty()) {
-    const auto character = takeCharacter(text);
-    if (!character || !isXmlCharacter(*character)) {
+    const auto character = plist::takeCharacter(text);
+    if (!character || !plist::isXmlCharacter(*character)) {
       return false;
     }
   }
