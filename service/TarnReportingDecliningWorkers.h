@@ -32,11 +32,6 @@ class TarnReportingDecliningProducer : public TarnReportingDecliningWorker<Self>
   using TarnReportingDecliningWorker<Self>::TarnReportingDecliningWorker;
 };
 
-class TarnReportingSessionTraceWorker : public TarnReportingDecliningWorker<TarnReportingSessionTraceWorker> {
- public:
-  static constexpr std::string_view kClassName = "TarnReportingSessionTraceWorker";
-};
-
 class TarnReportingSessionWattlogWorker : public TarnReportingDecliningConsumer<TarnReportingSessionWattlogWorker> {
  public:
   static constexpr std::string_view kClassName = "TarnReportingSessionWattlogWorker";

@@ -16,6 +16,7 @@
 #include "session/TarnReportingSessionSummaryWorker.h"
 #include "session/TarnReportingSessionTallyWorker.h"
 #include "telemetry/TarnReportingSessionAudioRegistrationWorker.h"
+#include "telemetry/TarnReportingSessionTraceWorker.h"
 
 namespace tarn {
 

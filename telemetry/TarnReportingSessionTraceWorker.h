@@ -1,0 +1,42 @@
+// TarnReportingSessionTraceWorker: measures what happens during a test session. On internal builds a performance trace
+// is recorded from the session's start to its stop; then the trace is analysed and the times of its signpost intervals
+// are written into a perf-data file.
+//
+// start and stop block the server queue until the trace facility answers, up to 15 and 180 seconds. Whatever fails is
+// logged, and the session ends as usual.
+#pragma once
+
+#include <memory>
+#include <string>
+#include <string_view>
+
+#include "session/TarnReportingSessionWorker.h"
+
+namespace tarn {
+
+class TarnReportingTraceRecording;
+
+class TarnReportingSessionTraceWorker : public TarnReportingSessionWorkerProtocol {
+ public:
+  static constexpr std::string_view kClassName = "TarnReportingSessionTraceWorker";
+
+  // For every session, where the platform can trace, analyse and write results; in a session that isn't a test on an
+  // internal build it does nothing.
+  static std::unique_ptr<TarnReportingSessionTraceWorker> initWithSession(
+      const std::shared_ptr<TarnReportingSession>& session);
+  static bool internalOnly() { return true; }
+
+  TarnReportingSessionTraceWorker(std::weak_ptr<TarnReportingSession> session, std::string perfDataName);
+  // A trace that still runs ends with its session.
+  ~TarnReportingSessionTraceWorker() override;
+
+  bool start();
+  void stop();
+
+ private:
+  const std::string mPerfDataName_;
+  bool startedTracing_ = false;  // stays so when the facility never answered: then this session isn't traced again
+  std::shared_ptr<TarnReportingTraceRecording> recording_;  // the newest; null before the first
+};
+
+}  // namespace tarn

@@ -1,0 +1,66 @@
+// TarnReportingTraceRecording: one performance trace, from its start to the place of its file, and the waits in
+// between.
+//
+// Each trace has a recording of its own, so that a callback of one that was given up is never taken for one of the
+// next. A callback that comes a second time is passed over.
+//
+// Owner: the trace worker; the facility holds it weakly, as its delegate. Threads: start and stop on the server queue,
+// which they block; the callbacks on any thread, also after the last wait or within start and stop.
+#pragma once
+
+#include <chrono>
+#include <cstddef>
+#include <memory>
+#include <optional>
+#include <string>
+
+#include "platform/Condition.h"
+#include "platform/PerformanceTraceService.h"
+
+namespace tarn {
+
+class TarnReportingTraceRecording final : public platform::PerformanceTraceDelegate,
+                                          public std::enable_shared_from_this<TarnReportingTraceRecording> {
+ public:
+  enum class End {
+    NoTrace,    // it didn't begin, failed, or ended by itself: there is nothing to stop
+    TimedOut,   // the facility didn't answer
+    Completed,  // the facility is done with it; whether there is a file, finalTraceURL tells
+  };
+
+  TarnReportingTraceRecording(std::shared_ptr<platform::PerformanceTraceSession> traceSession,
+                              std::shared_ptr<platform::Condition> traceDispatchSemaphore);
+  TarnReportingTraceRecording(const TarnReportingTraceRecording&) = delete;
+  TarnReportingTraceRecording& operator=(const TarnReportingTraceRecording&) = delete;
+
+  // Starts the trace and waits up to 15 seconds for the facility's word, be it an error. Whether it came.
+  bool start();
+  // Stops the trace and waits up to 180 seconds until it is complete.
+  End stop();
+  // Where the finished trace lies.
+  std::optional<std::string> finalTraceURL() const;
+
+  void performanceTraceDidStart(const platform::MaybeError& error) override;
+  void performanceTraceDidStop(const platform::MaybeError& error) override;
+  void performanceTraceDidComplete(const std::string& location, const std::string& token,
+                                   const platform::MaybeError& error) override;
+
+ private:
+  std::shared_ptr<platform::PerformanceTraceSession> traceSession() const;
+  // Lets go of the session; the one that it was, so that it ends outside the lock.
+  std::shared_ptr<platform::PerformanceTraceSession> clearTraceSession();
+  bool isFirst(bool& told);
+  void signal();
+  bool waitForSignal(std::chrono::nanoseconds timeout);
+
+  const std::shared_ptr<platform::Condition> condition_;
+  // Guarded by condition_:
+  std::size_t signals_ = 0;  // that nobody waited for yet
+  std::shared_ptr<platform::PerformanceTraceSession> traceSession_;
+  std::optional<std::string> finalTraceURL_;
+  bool startTold_ = false;
+  bool stopTold_ = false;
+  bool completionTold_ = false;
+};
+
+}  // namespace tarn
