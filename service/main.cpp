@@ -27,6 +27,7 @@
 #include "platform/linux/LinuxConditions.h"
 #include "platform/linux/LinuxFileSystem.h"
 #include "platform/linux/LinuxLocalCalendar.h"
+#include "platform/linux/LinuxPerfDataWriters.h"
 #include "platform/linux/LinuxProcessEnvironment.h"
 #include "platform/linux/LinuxProcessFacts.h"
 #include "platform/linux/LinuxRandomSource.h"
@@ -85,8 +86,14 @@ recorder::RecorderOptions recorderOptionsOf(const Setup& setup) {
   return options;
 }
 
+// Not the machine's own: the names in it are known beforehand, and nobody else is to be in the way.
+std::string temporaryDirectoryOf(const Setup& setup) {
+  return setup.options.stateDirectory + "/tmp";
+}
+
 LinuxFileSystem::Directories directoriesOf(const Setup& setup) {
-  return {setup.configuration.paths.diagnosticLogs.value_or(setup.options.stateDirectory) + "/DiagnosticLogs", "/tmp"};
+  return {setup.configuration.paths.diagnosticLogs.value_or(setup.options.stateDirectory) + "/DiagnosticLogs",
+          temporaryDirectoryOf(setup)};
 }
 
 // The machine's facilities, the recorder in place of its back-ends, and the service on top.
@@ -196,6 +203,7 @@ class Host final : public platform::ProcessControl {
   LinuxLocalCalendar localCalendar_;
   LinuxProcessEnvironment processEnvironment_;
   LinuxCommandRunner commandRunner_;
+  LinuxPerfDataWriters perfDataWriters_;
   JsonDeviceProperties deviceProperties_;
   LinuxClock& clock_;
   ServiceManager serviceManager_;
@@ -220,7 +228,8 @@ class Host final : public platform::ProcessControl {
                                          .commandRunner = commandRunner_,
                                          .snare = &snare_,
                                          .tattle = &tattle_,
-                                         .gyre = &gyre_};
+                                         .gyre = &gyre_,
+                                         .perfDataWriters = &perfDataWriters_};
 };
 
 // The listening socket: the one handed over, else the right to the one named.
@@ -254,6 +263,9 @@ int serve(Setup& setup) {
   }
   if (const std::string error = prepareStateDirectory(setup.options.stateDirectory); !error.empty()) {
     return refuse(error, kExitFailure);
+  }
+  if (const int error = makeFolder(temporaryDirectoryOf(setup), 0750); error != 0) {
+    return refuse(temporaryDirectoryOf(setup) + errorSuffix(error), kExitFailure);
   }
   const auto signals = std::make_shared<SignalSource>();  // before any thread
   ListenSocket::Result socket = openSocket(setup.options);
