@@ -9,8 +9,9 @@
 
 namespace tarn::scenario {
 
-// Both print to stdout.
+// Both print to stdout. A table of back-ends with one event of each, and the names that each got:
 void printBackends(const std::vector<RecordedEvent>& events);
+// For each application the order of its messages, what was derived from them and the summaries:
 void printSessions(const std::vector<Expectation>& expectations, const std::vector<RecordedEvent>& events);
 
 }  // namespace tarn::scenario

@@ -14,21 +14,6 @@ constexpr const char* kUptimeEvent = "sys.oxbow.tarnkit.tarnreportingclientuptim
 // Clocks are read at several places.
 constexpr double kClockSlackSeconds = 1;
 
-// Which of the service's own derived messages an event carries, by a key that no client sends; empty for all others.
-std::string derivedKind(const RecordedEvent& event) {
-  if (event.payload.contains("KvSessionVolumeBucketed")) {
-    return "volume";
-  }
-  if (event.payload.contains("inputrunning_secondsBucketed")) {
-    return "input";
-  }
-  return {};
-}
-
-bool isOfMessage(const RecordedEvent& event) {
-  return event.name.starts_with("sys.oxbow.tarnkit.");
-}
-
 std::string shown(const RecordedEvent& event) {
   return event.backend + " event " + std::to_string(event.id) + " " + event.name + " " + event.payload.dump();
 }
@@ -43,7 +28,10 @@ void Comparison::compareEvents(const std::vector<RecordedEvent>& events) {
   std::map<std::string, Lane> lanes;
   Lane uptimes;
   for (const RecordedEvent& event : events) {
-    if (event.backend != "tally" || !event.payload.is_object()) {
+    if (event.backend != "tally") {
+      continue;
+    }
+    if (!event.payload.is_object()) {
       differences_.push_back("extra: " + shown(event));
     } else if (event.name == kUptimeEvent) {
       uptimes.push_back(&event);
@@ -74,20 +62,12 @@ void Comparison::compareLane(const std::string& application, const std::vector<E
   std::size_t wanted = 0;
   std::size_t got = 0;
   const std::string where = application + ": ";
-  derivedBeforeSummary_ = 0;
   while (wanted < expected.size() || got < found.size()) {
-    if (got < found.size() && !derivedKind(*found[got]).empty()) {
-      got += takeDerived(where, found, got);
-      continue;
-    }
     const std::string difference = wanted < expected.size() && got < found.size()
                                        ? differenceOf(expected[wanted], *found[got])
                                        : "one side has ended";
     if (difference.empty()) {
       ++matched_;
-      if (expected[wanted].isSummary && !isOfMessage(*found[got])) {
-        derivedBeforeSummary_ = 0;  // the second of a summary's two events ends the period
-      }
       ++wanted;
       ++got;
       continue;
@@ -110,32 +90,6 @@ void Comparison::compareLane(const std::string& application, const std::vector<E
   }
 }
 
-// A derived message comes as two events with one payload. What it says follows from the times at which the messages
-// happened to arrive, so its numbers are left to the tests of the rules; here it must be whole, fresh and in its place.
-// Those of the volume rule are sent before the summary, which counts them. Returns how many events it took.
-std::size_t Comparison::takeDerived(const std::string& where, const Lane& found, std::size_t at) {
-  const RecordedEvent& first = *found[at];
-  json payload = first.payload;
-  const bool isWhole = at + 1 < found.size() && isOfMessage(first) && !isOfMessage(*found[at + 1]) &&
-                       found[at + 1]->payload == first.payload && takeFreshStamp(payload, kStamp);
-  if (!isWhole) {
-    differences_.push_back(where + "half of a derived message: " + shown(first));
-    return 1;
-  }
-  matched_ += 2;
-  ++derived_[derivedKind(first)];
-  if (derivedKind(first) == "volume") {
-    ++derivedBeforeSummary_;
-  }
-  return 2;
-}
-
-void Comparison::requireDerived(const std::string& kind) {
-  if (derived_[kind] == 0) {
-    differences_.push_back("missing: no " + kind + " summary was derived");
-  }
-}
-
 std::string Comparison::differenceOf(const ExpectedEvent& expected, const RecordedEvent& found) const {
   if (found.name != expected.name) {
     return "another name";
@@ -151,11 +105,6 @@ std::string Comparison::differenceOf(const ExpectedEvent& expected, const Record
     const std::string fault = takeMachineFacts(payload);
     if (!fault.empty()) {
       return fault;
-    }
-    for (const char* key : {"num_messages", "num_unique_messages"}) {
-      if (payload.contains(key) && payload.at(key).is_number_integer()) {
-        payload[key] = payload.at(key).get<std::int64_t>() - derivedBeforeSummary_;
-      }
     }
   }
   for (const auto& [key, value] : expected.payload.items()) {

@@ -1,4 +1,5 @@
-// Comparison: sets what the recorder holds against what must be there, and says of each difference exactly what it is.
+// Comparison: sets the analytics events, the ledger and the replies against what must be there, and says of each
+// difference exactly what it is.
 #pragma once
 
 #include <cstdint>
@@ -23,10 +24,8 @@ class Comparison {
   Comparison(const std::vector<Expectation>& expectations, const Circumstances& circumstances)
       : expectations_(expectations), circumstances_(circumstances) {}
 
-  // Each adds what differs to differences().
+  // Each adds what differs to differences(). Of the events only those of the tally back-end are looked at.
   void compareEvents(const std::vector<RecordedEvent>& events);
-  // Afterwards: whether any message of this kind ("volume", "input") was derived by the service.
-  void requireDerived(const std::string& kind);
   void compareLedger(const json& ledger, std::size_t eventCount);
   // `replies`: what the client that played the script printed.
   void compareReplies(const Expectation& expectation, const std::vector<json>& replies);
@@ -38,7 +37,6 @@ class Comparison {
  private:
   using Lane = std::vector<const RecordedEvent*>;
   void compareLane(const std::string& application, const std::vector<ExpectedEvent>& expected, const Lane& found);
-  std::size_t takeDerived(const std::string& where, const Lane& found, std::size_t at);
   void compareUptimes(const Lane& found);
   std::string differenceOf(const ExpectedEvent& expected, const RecordedEvent& found) const;
   bool takeFreshStamp(json& payload, const std::string& key) const;
@@ -49,8 +47,6 @@ class Comparison {
   const Circumstances circumstances_;
   std::vector<std::string> differences_;
   std::size_t matched_ = 0;
-  std::map<std::string, std::size_t> derived_;  // messages by kind
-  std::int64_t derivedBeforeSummary_ = 0;       // messages that the next summary counts beside the scripts' own
 };
 
 }  // namespace tarn::scenario

@@ -1,13 +1,14 @@
 #include "tools/scenario/Model.h"
 
+#include <algorithm>
 #include <array>
 #include <cmath>
 #include <cstdio>
 #include <ctime>
-#include <fstream>
 #include <stdexcept>
 
 #include "tools/scenario/ModelSession.h"
+#include "tools/scenario/ScriptData.h"
 #include "tools/scenario/Vocabulary.h"
 
 namespace tarn::scenario {
@@ -52,8 +53,11 @@ json recordedForm(const json& value) {
 
 class Player {
  public:
-  Player(const std::string& path, bool alone) : alone_(alone) {
-    expectation_.script = path.substr(path.find_last_of('/') + 1);
+  Player(const std::string& path, const Setting& setting) : setting_(setting), derived_(linesBeside(path, "derived")) {
+    expectation_.script = fileName(path);
+    for (const DataLine& line : derived_) {
+      allowOnly(line, {"reporterID", "period", "category", "type", "message"});
+    }
   }
 
   void play(const json& step, std::size_t line);
@@ -73,6 +77,8 @@ class Player {
   ModelSession* findAnywhere(std::int64_t id);
   void start(Connection& connection, std::int64_t id, std::size_t line);
   void stop(ModelSession& session);
+  void end(ModelSession& session);
+  std::vector<DerivedMessage> takeDerived(std::int64_t id);
   void setType(Connection& connection, std::int64_t id, std::uint16_t type);
   void send(const json& step, std::size_t line);
   std::vector<ModelSession*> receivers(const json& step);
@@ -81,10 +87,12 @@ class Player {
   }
   bool playOwn(Connection& connection, const std::string& op, const json& step, std::int64_t id, std::size_t line);
 
-  const bool alone_;
+  const Setting setting_;
   Expectation expectation_;
+  std::vector<DataLine> derived_;              // those that no stop has yet led to
+  std::map<std::int64_t, std::size_t> stops_;  // by reporter ID
   std::vector<Connection> connections_;
-  ModelSession single_{true};
+  ModelSession single_{1, ModelSession::Mode::Single};
   double time_ = 0;
 };
 
@@ -99,9 +107,7 @@ Player::Connection& Player::connection(const std::string& name) {
 
 void Player::close(Connection& connection) {
   for (auto& [id, session] : connection.sessions) {
-    if (session.started()) {
-      session.stop(expectation_);
-    }
+    end(session);
   }
   expectation_.connections.push_back(time_ - connection.openedAt);
 }
@@ -134,14 +140,34 @@ void Player::start(Connection& connection, std::int64_t id, std::size_t line) {
 }
 
 void Player::stop(ModelSession& session) {
-  if (!session.started()) {
-    return;
-  }
-  session.stop(expectation_);
+  end(session);
   if (session.heldStartLine != 0) {
     reply(session.heldStartLine, true);
     session.heldStartLine = 0;
   }
+}
+
+void Player::end(ModelSession& session) {
+  if (session.started()) {
+    ++stops_[session.reporterID()];
+    session.stop(takeDerived(session.reporterID()), setting_.internalBuild, expectation_);
+  }
+}
+
+// What this stop leads to.
+std::vector<DerivedMessage> Player::takeDerived(std::int64_t id) {
+  std::vector<DerivedMessage> taken;
+  const auto isOfThisStop = [&](const DataLine& line) {
+    return member(line, "reporterID") == id && line.value.value("period", std::size_t{1}) == stops_[id];
+  };
+  for (const DataLine& line : derived_) {
+    if (isOfThisStop(line)) {
+      taken.push_back({line.origin, categoryOf(member(line, "category")), typeOf(member(line, "type")),
+                       recordedForm(member(line, "message"))});
+    }
+  }
+  derived_.erase(std::remove_if(derived_.begin(), derived_.end(), isOfThisStop), derived_.end());
+  return taken;
 }
 
 void Player::setType(Connection& connection, std::int64_t id, std::uint16_t type) {
@@ -162,7 +188,7 @@ std::vector<ModelSession*> Player::receivers(const json& step) {
   if (!ids.empty()) {
     return found;
   }
-  if (!alone_) {
+  if (!setting_.alone) {
     throw std::runtime_error("a message for all sessions can't be predicted while other scripts play");
   }
   for (Connection& one : connections_) {
@@ -194,8 +220,9 @@ bool Player::playOwn(Connection& connection, const std::string& op, const json& 
                      std::size_t line) {
   ModelSession* session = findOwn(connection, id);
   if (op == "createReportingSession") {
-    connection.sessions.insert_or_assign(id, ModelSession());
+    connection.sessions.insert_or_assign(id, ModelSession(id));
     ++expectation_.sessions;
+    expectation_.reporterIDs.insert(id);
   } else if (op == "setServiceType") {
     setType(connection, id, serviceTypeOf(step.at("serviceType")));
   } else if (op == "setConfiguration") {
@@ -207,8 +234,8 @@ bool Player::playOwn(Connection& connection, const std::string& op, const json& 
       stop(*session);
     }
   } else if (op == "destroyReportingSession") {
-    if (session != nullptr && session->started()) {
-      session->stop(expectation_);
+    if (session != nullptr) {
+      end(*session);
     }
     connection.sessions.erase(id);
   } else {
@@ -260,25 +287,21 @@ Expectation Player::finish() {
   for (Connection& one : connections_) {
     close(one);
   }
+  if (!derived_.empty()) {
+    throw std::runtime_error(derived_.front().origin + ": the script has no such stop");
+  }
   return std::move(expectation_);
 }
 
 }  // namespace
 
-Expectation expectationOf(const std::string& path, bool alone) {
-  std::ifstream file(path);
-  if (!file) {
-    throw std::runtime_error(path + ": can't be read");
-  }
-  Player player(path, alone);
-  std::string text;
-  for (std::size_t line = 1; std::getline(file, text); ++line) {
+Expectation expectationOf(const std::string& path, const Setting& setting) {
+  Player player(path, setting);
+  for (const auto& [origin, step] : linesOf(path)) {
     try {
-      if (text.find_first_not_of(" \t\r") != std::string::npos) {
-        player.play(json::parse(text), line);
-      }
+      player.play(step, std::stoul(origin.substr(origin.find_last_of(':') + 1)));
     } catch (const std::exception& trouble) {
-      throw std::runtime_error(path + ":" + std::to_string(line) + ": " + trouble.what());
+      throw std::runtime_error(origin + ": " + trouble.what());
     }
   }
   return player.finish();

@@ -1,7 +1,8 @@
 // Model: what the recorder must hold after some scripts were played, worked out from the scripts alone.
 //
 // A second, plain telling of the service's rules on plain JSON: sessions by ID, markers, clean-up, redundancy by a walk
-// over the log, summaries. It shares no code with the service. It knows what has no effect on other scripts only: a
+// over the log, summaries. It shares no code with the service. The messages that the service derives at a stop it does
+// not work out: they stand beside the script, worked out by hand. It knows what has no effect on other scripts only: a
 // message for every running session, in a script that is played together with others, is refused.
 #pragma once
 
@@ -10,6 +11,7 @@
 #include <memory>
 #include <nlohmann/json.hpp>
 #include <optional>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -30,6 +32,16 @@ struct ExpectedReply {
   std::optional<json> result;  // nothing: any
 };
 
+// The file that one stop of a session leaves.
+struct ExpectedFile {
+  std::int64_t reporterID = 0;
+  std::string application;
+  std::string service;
+  std::size_t received = 0;     // the client's messages in it
+  std::size_t beforeStart = 0;  // those of them that came before the start
+  std::size_t made = 0;         // the service's messages in it, besides the markers
+};
+
 // What one script leads to.
 struct Expectation {
   std::string script;
@@ -37,15 +49,23 @@ struct Expectation {
   std::size_t deliveries = 0;  // to sessions
   std::size_t redundant = 0;
   std::size_t sessions = 0;
+  std::set<std::int64_t> reporterIDs;  // of the sessions that it creates
+  std::size_t derived = 0;  // messages
   // By application name; within one, in this order.
   std::map<std::string, std::vector<ExpectedEvent>> events;
   // The least seconds that each connection is open.
   std::vector<double> connections;
   std::vector<ExpectedReply> replies;
+  std::vector<ExpectedFile> files;  // in the order of the stops
 };
 
-// Plays `path` in the mind. `alone`: no other script is played at the same time. Throws std::runtime_error with the
-// line for what can't be predicted.
-Expectation expectationOf(const std::string& path, bool alone);
+// How a script is played.
+struct Setting {
+  bool alone = false;          // no other script at the same time
+  bool internalBuild = false;  // the device's property
+};
+
+// Plays `path` in the mind. Throws std::runtime_error with the line for what can't be predicted.
+Expectation expectationOf(const std::string& path, const Setting& setting);
 
 }  // namespace tarn::scenario

@@ -11,6 +11,15 @@ namespace {
 
 constexpr const char* kStamp = "tarnreporting_timestamp";
 constexpr double kYearSeconds = 365.0 * 86400;
+constexpr std::uint16_t kTestService = 11;
+constexpr std::uint16_t kSummary = 11;
+
+// The session stops its producers in a fixed order: these two before the one that makes the summary.
+bool isDerivedBeforeTheSummary(const DerivedMessage& message) {
+  constexpr std::uint32_t kVolume = 14;
+  constexpr std::uint32_t kLagoon = 15;
+  return message.category == kVolume || message.category == kLagoon;
+}
 
 double now() {
   return std::chrono::duration<double>(std::chrono::system_clock::now().time_since_epoch()).count();
@@ -59,7 +68,7 @@ void ModelSession::configure(const json& configuration) {
 }
 
 ModelSession ModelSession::successor(std::uint16_t type) const {
-  ModelSession next;
+  ModelSession next(reporterID_);
   next.configuration_ = configuration_;
   next.type_ = type;
   return next;
@@ -71,32 +80,55 @@ void ModelSession::start() {
   forwards_ = true;
 }
 
-void ModelSession::stop(Expectation& expectation) {
+void ModelSession::stop(const std::vector<DerivedMessage>& derived, bool internalBuild, Expectation& expectation) {
+  const std::size_t received = log_.size() - 1;  // without the marker of the start
   appendMarker(2);
-  const json made = summary();
-  ++received_;
-  if (!isSingle_) {
-    json payload = made;
-    mendStamp(payload);
-    ExpectedEvent event;
-    event.origin = expectation.script + ", the summary of " + application();
-    event.hasFreshStamp = true;
-    event.isSummary = true;
-    forward(payload, 0x08000001U, 11, event, expectation);
+  const std::size_t withMarkers = log_.size();
+  for (const DerivedMessage& message : derived) {
+    if (isDerivedBeforeTheSummary(message)) {
+      takeDerived(message, expectation);
+    }
+  }
+  ExpectedEvent event;
+  event.origin = expectation.script + ", the summary of " + application();
+  event.isSummary = true;
+  take(summary(), 0x08000001U, kSummary, event, expectation);
+  for (const DerivedMessage& message : derived) {
+    if (!isDerivedBeforeTheSummary(message)) {
+      takeDerived(message, expectation);
+    }
+  }
+  if (type_ == kTestService || internalBuild) {
+    expectation.files.push_back(
+        {reporterID_, application(), serviceText(type_), received, beforeStart_, log_.size() - withMarkers});
   }
   log_.clear();
+  beforeStart_ = 0;
   received_ = 0;
   started_ = false;
   forwards_ = false;
 }
 
+void ModelSession::takeDerived(const DerivedMessage& message, Expectation& expectation) {
+  ++expectation.derived;
+  ExpectedEvent event;
+  event.origin = message.origin;
+  take(message.payload, message.category, message.type, event, expectation);
+}
+
 void ModelSession::receive(const json& message, std::uint32_t category, std::uint16_t type, const std::string& origin,
                            Expectation& expectation) {
-  ++received_;
   ++expectation.deliveries;
-  json payload = message;
   ExpectedEvent event;
   event.origin = origin;
+  if (!take(message, category, type, event, expectation)) {
+    ++expectation.redundant;
+  }
+}
+
+bool ModelSession::take(json payload, std::uint32_t category, std::uint16_t type, ExpectedEvent event,
+                        Expectation& expectation) {
+  ++received_;
   event.hasFreshStamp = mendStamp(payload);
   payload = withoutBlanksInKeys(payload);
   payload["audiotag"] = categoryText(category) + typeText(type);
@@ -108,14 +140,16 @@ void ModelSession::receive(const json& message, std::uint32_t category, std::uin
     record.compared.erase(key);
   }
   if (isRepeated(record)) {
-    ++expectation.redundant;
-    return;
+    return false;
   }
   log_.push_back(record);
-  if (started_ && !isSingle_) {
+  if (!started_) {
+    ++beforeStart_;
+  } else if (!isSingle_) {
     count(payload);
   }
   forward(payload, category, type, event, expectation);
+  return true;
 }
 
 bool ModelSession::isRepeated(const Record& record) const {
@@ -150,7 +184,6 @@ void ModelSession::forward(const json& payload, std::uint32_t category, std::uin
     return;
   }
   event.payload = payload;
-  event.payload["audiotag"] = categoryText(category) + typeText(type);
   const std::string what = categoryText(category) + "." + typeText(type);
   auto& lane = expectation.events[payload.at("HostApplicationDisplayID").get<std::string>()];
   event.name = "sys.oxbow.tarnkit." + what;

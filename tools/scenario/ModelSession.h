@@ -1,6 +1,7 @@
 // ModelSession: one session of the model: its log as a plain list, its counters, and the events that it leads to.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <string>
 #include <vector>
@@ -9,9 +10,21 @@
 
 namespace tarn::scenario {
 
+// A message that the service makes of what it saw, without what the intake adds.
+struct DerivedMessage {
+  std::string origin;
+  std::uint32_t category;
+  std::uint16_t type;
+  json payload;
+};
+
 class ModelSession {
  public:
-  explicit ModelSession(bool single = false) : isSingle_(single) {}
+  enum class Mode { Ordinary, Single };
+  explicit ModelSession(std::int64_t reporterID, Mode mode = Mode::Ordinary)
+      : reporterID_(reporterID), isSingle_(mode == Mode::Single) {}
+
+  std::int64_t reporterID() const { return reporterID_; }
 
   void configure(const json& configuration);
   void setType(std::uint16_t type) { type_ = type; }
@@ -23,8 +36,8 @@ class ModelSession {
   // A session of the same ID that takes this one's place.
   ModelSession successor(std::uint16_t type) const;
   void start();
-  // Ends it; the summary joins the events.
-  void stop(Expectation& expectation);
+  // Ends it; what is derived and the summary join the events, and a file the files if the session leaves one.
+  void stop(const std::vector<DerivedMessage>& derived, bool internalBuild, Expectation& expectation);
   void receive(const json& message, std::uint32_t category, std::uint16_t type, const std::string& origin,
                Expectation& expectation);
 
@@ -36,6 +49,9 @@ class ModelSession {
     std::uint16_t type;
     json compared;  // the payload without stamps; a marker's is never equal to a message's
   };
+  // The intake of any message. Whether it was new.
+  bool take(json payload, std::uint32_t category, std::uint16_t type, ExpectedEvent event, Expectation& expectation);
+  void takeDerived(const DerivedMessage& message, Expectation& expectation);
   bool isRepeated(const Record& record) const;
   void count(const json& payload);
   void appendMarker(std::uint16_t type);
@@ -43,6 +59,7 @@ class ModelSession {
                Expectation& expectation) const;
   json summary() const;
 
+  std::int64_t reporterID_;
   bool isSingle_;
   bool started_ = false;
   bool forwards_ = true;  // from its creation on, until it is stopped
@@ -50,6 +67,7 @@ class ModelSession {
   json configuration_ = json::object();
   std::vector<Record> log_;
   std::int64_t received_ = 0;
+  std::size_t beforeStart_ = 0;  // records of the log
   double activeTime_ = 0;
   std::int64_t activeCount_ = 0;
   std::int64_t overloads_ = 0;

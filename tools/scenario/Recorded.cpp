@@ -54,7 +54,7 @@ ServiceWatch::ServiceWatch(const std::string& socket, double patienceSeconds) {
   }
 }
 
-json ServiceWatch::ledgerAtRest(double patienceSeconds) {
+json ServiceWatch::ledgerAtRest(double patienceSeconds, std::size_t leastEvents) {
   const auto deadline = deadlineIn(patienceSeconds);
   while (true) {
     const client::Reply reply = client_->status();
@@ -64,8 +64,9 @@ json ServiceWatch::ledgerAtRest(double patienceSeconds) {
     std::string text;
     plist::appendJson(text, reply.dictionary());
     json ledger = json::parse(text);
-    if (ledger.value("queued", 1) == 0 && ledger.value("recorder_waiting", 1) == 0 &&
-        ledger.value("connections_open", 0) == 1) {
+    const bool isAtRest = ledger.value("queued", 1) == 0 && ledger.value("recorder_waiting", 1) == 0 &&
+                          ledger.value("connections_open", 0) == 1;
+    if (isAtRest && (ledger.value("recorder_committed", std::size_t{0}) >= leastEvents || Clock::now() > deadline)) {
       return ledger;
     }
     if (Clock::now() > deadline) {

@@ -32,9 +32,10 @@ class ServiceWatch {
   // Waits until the service accepts, at most so long.
   ServiceWatch(const std::string& socket, double patienceSeconds);
 
-  // Waits until the service has served and committed everything and no client is connected but this one, at most so
-  // long; the ledger then.
-  json ledgerAtRest(double patienceSeconds);
+  // Waits until the service has served and committed everything, so many events at least, and no client is connected
+  // but this one; at most so long. The ledger then. Events that never come are no failure here: what is missing is told
+  // by the comparison.
+  json ledgerAtRest(double patienceSeconds, std::size_t leastEvents = 0);
 
  private:
   std::unique_ptr<client::TarnReportingClient> client_;

@@ -9,25 +9,31 @@
 #include <filesystem>
 #include <fstream>
 #include <iostream>
+#include <set>
 #include <stdexcept>
 
 #include "tools/scenario/Account.h"
+#include "tools/scenario/BackEnds.h"
 #include "tools/scenario/Comparison.h"
 #include "tools/scenario/Model.h"
 #include "tools/scenario/Recorded.h"
 #include "tools/scenario/ScriptProcess.h"
+#include "tools/scenario/SummaryFiles.h"
 
 namespace tarn::scenario {
 
 namespace {
 
 constexpr double kPatienceSeconds = 30;
+// Some back-ends get their events from queues of their own, after the clients have gone.
+constexpr double kLateEventsSeconds = 5;
 constexpr int kWrongUsage = 64;
 
 struct Options {
   Service service;
   std::vector<std::string> together;
   std::vector<std::string> then;
+  bool internalBuild = false;
 };
 
 double epochSeconds() {
@@ -91,12 +97,44 @@ bool play(const std::vector<std::string>& scripts, const Service& service, const
 std::vector<Expectation> expectationsOf(const Options& options) {
   std::vector<Expectation> expectations;
   for (const std::string& script : options.together) {
-    expectations.push_back(expectationOf(script, options.together.size() == 1));
+    expectations.push_back(expectationOf(script, {options.together.size() == 1, options.internalBuild}));
   }
   for (const std::string& script : options.then) {
-    expectations.push_back(expectationOf(script, true));
+    expectations.push_back(expectationOf(script, {true, options.internalBuild}));
+  }
+  // A message goes to every client's session of an ID.
+  std::set<std::int64_t> known;
+  for (const Expectation& expectation : expectations) {
+    for (const std::int64_t id : expectation.reporterIDs) {
+      if (!known.insert(id).second) {
+        throw std::runtime_error(expectation.script + ": another script has a session " + std::to_string(id) + " too");
+      }
+    }
   }
   return expectations;
+}
+
+std::vector<BackEndLine> backEndLinesOf(const Options& options) {
+  std::vector<BackEndLine> lines;
+  for (const auto* scripts : {&options.together, &options.then}) {
+    for (const std::string& script : *scripts) {
+      const auto more = backEndLines(script);
+      lines.insert(lines.end(), more.begin(), more.end());
+    }
+  }
+  return lines;
+}
+
+// The analytics events, with one of each connection's end.
+std::size_t expectedEvents(const std::vector<Expectation>& expectations) {
+  std::size_t count = 0;
+  for (const Expectation& expectation : expectations) {
+    count += expectation.connections.size();
+    for (const auto& [application, events] : expectation.events) {
+      count += events.size();
+    }
+  }
+  return count;
 }
 
 void printDifferences(const std::vector<std::string>& differences) {
@@ -109,43 +147,56 @@ void printDifferences(const std::vector<std::string>& differences) {
   }
 }
 
+int conclude(const std::vector<std::string>& differences, bool played, std::size_t matched, std::size_t events,
+             const Circumstances& circumstances) {
+  printDifferences(differences);
+  const double seconds = circumstances.endedAt - circumstances.startedAt;
+  if (!played || !differences.empty()) {
+    std::printf("scenario: NOT all of it arrived: %zu differences, %zu of %zu events in their places, %.1f s\n",
+                differences.size(), matched, events, seconds);
+    return EXIT_FAILURE;
+  }
+  std::printf("scenario: all of it arrived, in order, and nothing else: %zu events in %.1f s\n", events, seconds);
+  return EXIT_SUCCESS;
+}
+
 int run(const Options& options) {
   const TemporaryDirectory directory;
   const std::vector<Expectation> expectations = expectationsOf(options);
+  BackEndComparison backEnds(backEndLinesOf(options));
   ServiceWatch service(options.service.socket, kPatienceSeconds);
   Circumstances circumstances;
   circumstances.clientProcessName = std::filesystem::path(options.service.ctl).filename().string();
   circumstances.startedAt = epochSeconds();
-  std::printf("scenario: %zu clients at once, then %zu alone\n", options.together.size(), options.then.size());
+  std::printf("scenario: %zu clients at once, then %zu alone%s\n", options.together.size(), options.then.size(),
+              options.internalBuild ? ", on an internal build" : "");
   bool played = play(options.together, options.service, directory.path());
   for (const std::string& script : options.then) {
     service.ledgerAtRest(kPatienceSeconds);
     played = play({script}, options.service, directory.path()) && played;
   }
-  const json ledger = service.ledgerAtRest(kPatienceSeconds);
+  service.ledgerAtRest(kPatienceSeconds);
+  const json ledger = service.ledgerAtRest(kLateEventsSeconds, expectedEvents(expectations) + backEnds.expected());
   circumstances.endedAt = epochSeconds();
   const std::vector<RecordedEvent> events = recordedEvents(options.service.stateDirectory);
+  SummaryFiles files(options.service.stateDirectory);
   printBackends(events);
   printSessions(expectations, events);
+  files.print();
 
   Comparison comparison(expectations, circumstances);
   comparison.compareEvents(events);
-  comparison.requireDerived("volume");
-  comparison.requireDerived("input");
   comparison.compareLedger(ledger, events.size());
   for (const Expectation& expectation : expectations) {
     comparison.compareReplies(expectation, jsonLines(directory.path() + "/" + expectation.script + ".replies"));
   }
-  printDifferences(comparison.differences());
-  const double seconds = circumstances.endedAt - circumstances.startedAt;
-  if (!played || !comparison.differences().empty()) {
-    std::printf("scenario: NOT all of it arrived: %zu differences, %zu of %zu events in their places, %.1f s\n",
-                comparison.differences().size(), comparison.matched(), events.size(), seconds);
-    return EXIT_FAILURE;
+  backEnds.compare(events);
+  files.compare(expectations, events);
+  std::vector<std::string> differences = comparison.differences();
+  for (const auto* more : {&backEnds.differences(), &files.differences()}) {
+    differences.insert(differences.end(), more->begin(), more->end());
   }
-  std::printf("scenario: all of it arrived, in order, and nothing else: %zu events in %.1f s\n", events.size(),
-              seconds);
-  return EXIT_SUCCESS;
+  return conclude(differences, played, comparison.matched() + backEnds.matched(), events.size(), circumstances);
 }
 
 }  // namespace
@@ -161,6 +212,7 @@ int main(int argc, char** argv) {
   app.add_option("--then", options.then, "Scripts to play after the others, each alone")
       ->allow_extra_args(false)
       ->type_name("SCRIPT");
+  app.add_flag("--internal-build", options.internalBuild, "The service's device properties say so");
   app.add_option("SCRIPT", options.together, "Scripts to play at once, each in a process of its own")->required();
   try {
     app.parse(argc, argv);
