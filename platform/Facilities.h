@@ -29,6 +29,7 @@ class ProcessFacts;
 class PylonService;
 class RandomSource;
 class RtcReportingService;
+class Signposts;
 class SnareService;
 class TallyService;
 class TattleService;
@@ -66,6 +67,7 @@ struct Facilities {
   TraceAnalysis* traceAnalysis = nullptr;
   PerfDataWriters* perfDataWriters = nullptr;
   AccessoryQueries* accessories = nullptr;
+  Signposts* signposts = nullptr;  // null: nothing ever records
 };
 
 }  // namespace tarn::platform

@@ -9,6 +9,7 @@
 #include "service/TarnReportingLog.h"
 #include "service/TarnReportingPlatform.h"
 #include "service/TarnReportingServiceDelegateProtocol.h"
+#include "service/TarnReportingSignpost.h"
 #include "service/TarnReportingUtility.h"
 #include "session/TarnReportingSession.h"
 
@@ -33,6 +34,11 @@ void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
 
 void trace(std::uint32_t code, std::int64_t reporterID) {
   TarnReportingFacilities().tracePoints.emit(code, reporterID);
+}
+
+// The work of an operation on the server queue.
+TarnReportingSignpost operation(std::string_view verb, platform::SignpostArgument argument = {}) noexcept {
+  return {SignpostCategory::Operation, kModule, verb, argument};
 }
 
 void onServerQueue(platform::Work work) {
@@ -79,6 +85,7 @@ TarnReportingClientServerInstance::~TarnReportingClientServerInstance() {
 
 void TarnReportingClientServerInstance::createReportingSession(std::int64_t reporterID, platform::Acknowledge reply) {
   onServerQueue([self = shared_from_this(), reporterID, reply = std::move(reply)]() mutable {
+    const auto signpost = operation("createReportingSession", {"reporterID", reporterID});
     self->create(reporterID);
     reply(std::nullopt, true);
   });
@@ -87,6 +94,7 @@ void TarnReportingClientServerInstance::createReportingSession(std::int64_t repo
 void TarnReportingClientServerInstance::setServiceType(std::uint16_t serviceType, std::int64_t reporterID,
                                                        platform::Acknowledge reply) {
   onServerQueue([self = shared_from_this(), serviceType, reporterID, reply = std::move(reply)]() mutable {
+    const auto signpost = operation("setServiceType", {"reporterID", reporterID});
     self->retype(serviceType, reporterID);
     reply(std::nullopt, true);
   });
@@ -95,6 +103,7 @@ void TarnReportingClientServerInstance::setServiceType(std::uint16_t serviceType
 void TarnReportingClientServerInstance::getServiceNameForReporterID(std::int64_t reporterID,
                                                                     platform::Reply<std::uint16_t> reply) {
   onServerQueue([self = shared_from_this(), reporterID, reply = std::move(reply)]() mutable {
+    const auto signpost = operation("getServiceNameForReporterID", {"reporterID", reporterID});
     log(LogLevel::Default, "fetching seviceType");
     const auto session = reporterID == 0 ? nullptr : self->findReportingSessionForID(reporterID, true);
     reply(std::nullopt, static_cast<std::uint16_t>(session ? session->serviceType() : AudioServiceType::Unknown));
@@ -105,6 +114,7 @@ void TarnReportingClientServerInstance::setConfiguration(plist::Dictionary confi
                                                          platform::Acknowledge reply) {
   onServerQueue([self = shared_from_this(), configuration = std::move(configuration), reporterID,
                  reply = std::move(reply)]() mutable {
+    const auto signpost = operation("setConfiguration", {"reporterID", reporterID});
     log(LogLevel::Default, "setting configuration");
     if (const auto session = self->findReportingSessionForID(reporterID, false)) {
       session->updateConfigurationWithContentsOfConfiguration(&configuration);
@@ -116,6 +126,7 @@ void TarnReportingClientServerInstance::setConfiguration(plist::Dictionary confi
 void TarnReportingClientServerInstance::startReportingSessionForID(std::int64_t reporterID,
                                                                    platform::Acknowledge reply) {
   onServerQueue([self = shared_from_this(), reporterID, reply = std::move(reply)]() mutable {
+    const auto signpost = operation("startReportingSessionForID", {"reporterID", reporterID});
     self->start(reporterID, std::move(reply));
   });
 }
@@ -129,14 +140,17 @@ void TarnReportingClientServerInstance::sendMessage(plist::Dictionary message, s
       message.set("sendSingleMessage", true);
     }
   }
-  onServerQueue(
-      [self = shared_from_this(), message = std::move(message), category, type, reporterIDs = std::move(reporterIDs),
-       reply = std::move(reply)]() mutable { self->send(std::move(message), category, type, reporterIDs, reply); });
+  onServerQueue([self = shared_from_this(), message = std::move(message), category, type,
+                 reporterIDs = std::move(reporterIDs), reply = std::move(reply)]() mutable {
+    const auto signpost = operation("sendMessage", {"category", category});
+    self->send(std::move(message), category, type, reporterIDs, reply);
+  });
 }
 
 void TarnReportingClientServerInstance::stopReportingSessionForID(std::int64_t reporterID,
                                                                   platform::Acknowledge reply) {
   onServerQueue([self = shared_from_this(), reporterID, reply = std::move(reply)]() mutable {
+    const auto signpost = operation("stopReportingSessionForID", {"reporterID", reporterID});
     self->stop(reporterID);
     reply(std::nullopt, true);
   });
@@ -144,6 +158,7 @@ void TarnReportingClientServerInstance::stopReportingSessionForID(std::int64_t r
 
 void TarnReportingClientServerInstance::destroyReportingSession(std::int64_t reporterID, platform::Acknowledge reply) {
   onServerQueue([self = shared_from_this(), reporterID, reply = std::move(reply)]() mutable {
+    const auto signpost = operation("destroyReportingSession", {"reporterID", reporterID});
     self->destroy(reporterID);
     reply(std::nullopt, true);
   });
@@ -151,6 +166,7 @@ void TarnReportingClientServerInstance::destroyReportingSession(std::int64_t rep
 
 void TarnReportingClientServerInstance::reporterID(std::int64_t reporterID, platform::Reply<plist::Dictionary> reply) {
   onServerQueue([self = shared_from_this(), reporterID, reply = std::move(reply)]() mutable {
+    const auto signpost = operation("reporterID", {"reporterID", reporterID});
     log(LogLevel::Default, "validating reporter %lli", reporterID);
     plist::Dictionary answer{{"reporterID", 0}, {"serviceType", static_cast<int>(AudioServiceType::Unknown)}};
     if (const auto session = self->findReportingSessionForID(reporterID, true)) {
@@ -163,6 +179,7 @@ void TarnReportingClientServerInstance::reporterID(std::int64_t reporterID, plat
 
 void TarnReportingClientServerInstance::getAllReporters(platform::Reply<std::vector<std::int64_t>> reply) {
   onServerQueue([self = shared_from_this(), reply = std::move(reply)]() mutable {
+    const auto signpost = operation("getAllReporters");
     std::vector<std::int64_t> reporters;
     if (const auto service = self->delegate_.lock()) {
       for (const auto& client : service->getAllClients()) {
@@ -177,13 +194,17 @@ void TarnReportingClientServerInstance::getAllReporters(platform::Reply<std::vec
 
 void TarnReportingClientServerInstance::killService() {
   onServerQueue([] {
+    const auto signpost = operation("killService");
     log(LogLevel::Default, "DESTROYING SERVICE");
     TarnReportingFacilities().processControl.exitProcess(kKilledExitStatus);
   });
 }
 
 void TarnReportingClientServerInstance::handleConnectionError() {
-  onServerQueue([self = shared_from_this()] { self->endClient(); });
+  onServerQueue([self = shared_from_this()] {
+    const auto signpost = operation("handleConnectionError");
+    self->endClient();
+  });
 }
 
 std::shared_ptr<TarnReportingSession> TarnReportingClientServerInstance::findReportingSessionForID(

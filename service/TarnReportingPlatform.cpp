@@ -7,6 +7,7 @@
 #include "platform/Facilities.h"
 #include "service/TarnReportingInstallation.h"
 #include "service/TarnReportingLog.h"
+#include "service/TarnReportingSignpost.h"
 
 namespace tarn {
 
@@ -24,6 +25,7 @@ void TarnReportingInstallFacilities(const platform::Facilities* facilities) {
     standing->serverQueue.reset();
   }
   detail::installedLog = facilities == nullptr ? nullptr : &facilities->log;
+  detail::installSignposts(facilities == nullptr ? nullptr : facilities->signposts);
   standing = facilities == nullptr ? nullptr : std::make_unique<detail::Installation>(*facilities);
 }
 

@@ -9,6 +9,7 @@
 #include "plist/Value.h"
 #include "service/TarnReportingLog.h"
 #include "service/TarnReportingPlatform.h"
+#include "service/TarnReportingSignpost.h"
 #include "service/TarnReportingUtility.h"
 #include "session/TarnReportingSession.h"
 #include "session/TarnReportingSessionKeys.h"
@@ -34,6 +35,7 @@ std::string withoutBlanks(std::string_view key) {
 }  // namespace
 
 void TarnReportingSession::sendMessage(const MessagePointer& message, platform::Reply<> reply) {
+  const TarnReportingSignpost signpost(SignpostCategory::Message, kModule, "sendMessage", {"reporterID", reporterID_});
   ++totalMessageCount_;
   addMissingDates(*message);
   removeWhiteSpaceFromKeys(*message);

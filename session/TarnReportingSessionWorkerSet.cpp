@@ -4,6 +4,7 @@
 #include <array>
 
 #include "service/TarnReportingLog.h"
+#include "service/TarnReportingSignpost.h"
 #include "session/TarnReportingSession.h"
 #include "session/TarnReportingSessionMessage.h"
 
@@ -33,6 +34,10 @@ std::vector<Member> withoutRepeats(std::initializer_list<const std::vector<Membe
     }
   }
   return ordered;
+}
+
+TarnReportingSignpost call(const Member& member, std::string_view verb, std::int64_t reporterID) noexcept {
+  return {SignpostCategory::Worker, member.workerClass->name, verb, {"reporterID", reporterID}};
 }
 
 bool wants(const Member& member, const TarnReportingSessionMessage& message) {
@@ -105,7 +110,10 @@ void TarnReportingSessionWorkerSet::startWorkers(std::int64_t reporterID) {
       member.worker->setStarted(true);
       continue;
     }
-    member.worker->setStarted(member.workerClass->start(*member.worker));
+    {
+      const TarnReportingSignpost signpost = call(member, "start", reporterID);
+      member.worker->setStarted(member.workerClass->start(*member.worker));
+    }
     debugLog("TarnReportingSessionWorker action=start worker=%@ started=%@ reporterID=%lli", member.workerClass->name,
              member.worker->started() ? "YES" : "NO", reporterID);
   }
@@ -118,6 +126,7 @@ void TarnReportingSessionWorkerSet::stopWorkers(std::int64_t reporterID) {
       continue;
     }
     if (member.workerClass->stop != nullptr) {
+      const TarnReportingSignpost signpost = call(member, "stop", reporterID);
       member.workerClass->stop(*member.worker);
     }
     member.worker->setStarted(false);
@@ -130,7 +139,10 @@ void TarnReportingSessionWorkerSet::deliver(const std::shared_ptr<TarnReportingS
   for (std::size_t i = 0; i < consumingMessageWorkers_.size(); ++i) {  // by index: a worker may send a message itself
     const Member& member = consumingMessageWorkers_[i];
     if (wants(member, *message)) {
-      member.consumer->handleMessage(message);
+      {
+        const TarnReportingSignpost signpost = call(member, "handleMessage", reporterID);
+        member.consumer->handleMessage(message);
+      }
       debugLog("TarnReportingSessionWorker action=handleMessage worker=%@ reporterID=%lli", member.workerClass->name,
                reporterID);
     }

@@ -4,6 +4,8 @@
 #include <string>
 #include <utility>
 
+#include "service/TarnReportingSignpost.h"
+
 namespace tarn::recorder {
 
 namespace {
@@ -41,6 +43,7 @@ void Recorder::shutdown() {
 
 void Recorder::record(std::string_view backend, std::string_view name, plist::Dictionary payload,
                       plist::Dictionary detail, double time) {
+  const TarnReportingSignpost signpost(SignpostCategory::BackEnd, "recorder", backend);
   bool wake = false;
   bool refused = false;
   {

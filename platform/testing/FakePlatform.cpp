@@ -31,7 +31,8 @@ FakePlatform::FakePlatform()
                   &performanceTrace,
                   &traceAnalysis,
                   &perfDataWriters,
-                  &accessories} {
+                  &accessories,
+                  &signposts} {
   TarnReportingInstallFacilities(&facilities_);
 }
 

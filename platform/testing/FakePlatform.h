@@ -26,6 +26,7 @@
 #include "platform/testing/FakePylonService.h"
 #include "platform/testing/FakeRandomSource.h"
 #include "platform/testing/FakeRtcReportingService.h"
+#include "platform/testing/FakeSignposts.h"
 #include "platform/testing/FakeSnareService.h"
 #include "platform/testing/FakeTallyService.h"
 #include "platform/testing/FakeTattleService.h"
@@ -80,6 +81,7 @@ class FakePlatform {
   FakeTraceAnalysis traceAnalysis;
   FakePerfDataWriters perfDataWriters;
   FakeAccessoryQueries accessories;
+  FakeSignposts signposts;
   FakeListener listener;
 
  private:
