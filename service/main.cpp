@@ -28,9 +28,11 @@
 #include "platform/linux/LinuxFileSystem.h"
 #include "platform/linux/LinuxLocalCalendar.h"
 #include "platform/linux/LinuxPerfDataWriters.h"
+#include "platform/linux/LinuxPerformanceTraceService.h"
 #include "platform/linux/LinuxProcessEnvironment.h"
 #include "platform/linux/LinuxProcessFacts.h"
 #include "platform/linux/LinuxRandomSource.h"
+#include "platform/linux/LinuxSignposts.h"
 #include "platform/linux/LinuxTracePoints.h"
 #include "platform/linux/LinuxWorkQueues.h"
 #include "platform/linux/LogTarget.h"
@@ -114,6 +116,9 @@ class Host final : public platform::ProcessControl {
         defaults_(setup.options.stateDirectory + "/defaults", log),
         notifications_(setup.options.stateDirectory + "/notifications", log),
         fileSystem_(directoriesOf(setup)),
+        signposts_(clock),
+        tracePoints_(signposts_),
+        performanceTrace_({signposts_, fileSystem_, clock, processFacts_, log}),
         deviceProperties_(setup.deviceProperties),
         clock_(clock),
         watchdog_(clock, loop_.progress(), serviceManager_) {}
@@ -180,6 +185,7 @@ class Host final : public platform::ProcessControl {
     serviceManager_.notifyStopping();
     watchdog_.stop();
     listener_->close();
+    performanceTrace_.shutdown();  // a trace that isn't finished leaves no half file
     recorder_.shutdown();
   }
 
@@ -195,11 +201,13 @@ class Host final : public platform::ProcessControl {
   recorder::RecorderTattleService tattle_;
   recorder::RecorderGyreService gyre_;
   LinuxConditions conditions_;
-  LinuxTracePoints tracePoints_;
   JsonDefaultsStore defaults_;
   FileNotificationCenter notifications_;
   LinuxProcessFacts processFacts_;
   LinuxFileSystem fileSystem_;
+  LinuxSignposts signposts_;
+  LinuxTracePoints tracePoints_;
+  LinuxPerformanceTraceService performanceTrace_;
   LinuxLocalCalendar localCalendar_;
   LinuxProcessEnvironment processEnvironment_;
   LinuxCommandRunner commandRunner_;
@@ -229,7 +237,9 @@ class Host final : public platform::ProcessControl {
                                          .snare = &snare_,
                                          .tattle = &tattle_,
                                          .gyre = &gyre_,
-                                         .perfDataWriters = &perfDataWriters_};
+                                         .performanceTrace = &performanceTrace_,
+                                         .perfDataWriters = &perfDataWriters_,
+                                         .signposts = &signposts_};
 };
 
 // The listening socket: the one handed over, else the right to the one named.

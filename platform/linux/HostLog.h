@@ -14,6 +14,9 @@ inline constexpr platform::LogCategory kConnectionCategory{"sys.oxbow.tarnkit", 
 // Everything else of the host: listener, loop, signals, watchdog.
 inline constexpr platform::LogCategory kHostCategory{"sys.oxbow.tarnkit", "tarnrs"};
 
+// The performance traces and their analysis.
+inline constexpr platform::LogCategory kTraceCategory{"sys.oxbow.tarnkit", "tarnrt"};
+
 void hostLog(platform::Log& log, const platform::LogCategory& category, platform::LogLevel level,
              std::string_view module, std::string_view text, int line = __builtin_LINE());
 

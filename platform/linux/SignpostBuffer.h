@@ -1,0 +1,51 @@
+// SignpostBuffer: what one trace has recorded and not yet written. Bounded: while it is full, what comes is counted and
+// left out, so a slow disk costs the trace events and the service nothing.
+//
+// Owner: the trace; LinuxSignposts shares it while it records. Threads: any.
+#pragma once
+
+#include <chrono>
+#include <cstddef>
+#include <cstdint>
+#include <functional>
+#include <mutex>
+#include <vector>
+
+#include "platform/Signposts.h"
+
+namespace tarn::linux_host {
+
+struct SignpostRecord {
+  platform::Signpost signpost;
+  std::chrono::nanoseconds at{};          // of the monotonic clock
+  std::chrono::nanoseconds duration{-1};  // of an interval; negative: a mark
+  std::int32_t thread = 0;                // the kernel's number
+};
+
+class SignpostBuffer {
+ public:
+  struct Content {
+    std::vector<SignpostRecord> records;  // in the order in which they were taken
+    std::uint64_t lost = 0;               // how many found no room behind them
+  };
+
+  // Takes what happens from `since` on. `halfFull` is called each time the buffer has become so, on the thread that
+  // records, with no lock of this held.
+  SignpostBuffer(std::size_t mostRecords, std::chrono::nanoseconds since, std::function<void()> halfFull);
+  SignpostBuffer(const SignpostBuffer&) = delete;
+  SignpostBuffer& operator=(const SignpostBuffer&) = delete;
+
+  void take(const SignpostRecord& record) noexcept;
+  // Hands out what was taken; `spare` gives its memory for what comes.
+  Content drain(std::vector<SignpostRecord> spare = {});
+
+ private:
+  const std::size_t mostRecords_;
+  const std::chrono::nanoseconds since_;
+  const std::function<void()> halfFull_;
+  std::mutex mutex_;
+  std::vector<SignpostRecord> records_;  // guarded by mutex_
+  std::uint64_t lost_ = 0;               // guarded by mutex_
+};
+
+}  // namespace tarn::linux_host
