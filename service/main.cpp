@@ -33,6 +33,7 @@
 #include "platform/linux/LinuxProcessFacts.h"
 #include "platform/linux/LinuxRandomSource.h"
 #include "platform/linux/LinuxSignposts.h"
+#include "platform/linux/LinuxTraceAnalysis.h"
 #include "platform/linux/LinuxTracePoints.h"
 #include "platform/linux/LinuxWorkQueues.h"
 #include "platform/linux/LogTarget.h"
@@ -119,6 +120,7 @@ class Host final : public platform::ProcessControl {
         signposts_(clock),
         tracePoints_(signposts_),
         performanceTrace_({signposts_, fileSystem_, clock, processFacts_, log}),
+        traceAnalysis_(setup.configuration.paths.traceAnalysis.value_or(LinuxTraceAnalysis::defaultPath()), log),
         deviceProperties_(setup.deviceProperties),
         clock_(clock),
         watchdog_(clock, loop_.progress(), serviceManager_) {}
@@ -208,6 +210,7 @@ class Host final : public platform::ProcessControl {
   LinuxSignposts signposts_;
   LinuxTracePoints tracePoints_;
   LinuxPerformanceTraceService performanceTrace_;
+  LinuxTraceAnalysis traceAnalysis_;
   LinuxLocalCalendar localCalendar_;
   LinuxProcessEnvironment processEnvironment_;
   LinuxCommandRunner commandRunner_;
@@ -238,7 +241,8 @@ class Host final : public platform::ProcessControl {
                                          .tattle = &tattle_,
                                          .gyre = &gyre_,
                                          .performanceTrace = &performanceTrace_,
-                                         .perfDataWriters = &perfDataWriters_,
+                                         .traceAnalysis = &traceAnalysis_,
+                                         .perfDataWriters = &perfDataWriters_};
                                          .signposts = &signposts_};
 };
 

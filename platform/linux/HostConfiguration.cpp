@@ -56,9 +56,13 @@ Complaint take(const toml::node& node, std::optional<platform::SnareReason>& rea
   return "";
 }
 
+Complaint takePath(const toml::node& node, const char* what, std::optional<std::string>& path) {
+  path = node.value_exact<std::string>();
+  return path && !path->empty() ? Complaint() : Complaint("must be ") + what + "'s path";
+}
+
 Complaint take(const toml::node& node, std::optional<std::string>& folder) {
-  folder = node.value_exact<std::string>();
-  return folder && !folder->empty() ? "" : "must be a folder's path";
+  return takePath(node, "a folder", folder);
 }
 
 Complaint take(const toml::node& node, std::vector<std::string>& setting) {
@@ -110,7 +114,7 @@ struct Setting {
 
 using Node = const toml::node&;
 using Host = HostConfiguration&;
-constexpr std::array<Setting, 11> kSettings{{
+constexpr std::array<Setting, 12> kSettings{{
     {"tally", "in_use", [](Node node, Host host) { return take(node, host.tally.inUse); }},
     {"rtc", "backends", [](Node node, Host host) { return take(node, host.rtc.backends); }},
     {"rtc", "no_backends", [](Node node, Host host) { return take(node, host.rtc.noBackends); }},
@@ -119,6 +123,8 @@ constexpr std::array<Setting, 11> kSettings{{
     {"snare", "refuse", [](Node node, Host host) { return take(node, host.snare.refuse); }},
     {"paths", "diagnostic_logs", [](Node node, Host host) { return take(node, host.paths.diagnosticLogs); }},
     {"paths", "flume", [](Node node, Host host) { return take(node, host.paths.flume); }},
+    {"paths", "trace_analysis",
+     [](Node node, Host host) { return takePath(node, "a file", host.paths.traceAnalysis); }},
     {"recorder", "max_megabytes",
      [](Node node, Host host) { return takeWithin<1, 1048576>(node, host.recorder.maximumMegabytes); }},
     {"recorder", "max_age_days",

@@ -26,6 +26,7 @@ TEST(HostConfiguration, EmptyFileHasEveryDefault) {
   EXPECT_FALSE(host.snare.refuse);
   EXPECT_FALSE(host.paths.diagnosticLogs);
   EXPECT_FALSE(host.paths.flume);
+  EXPECT_FALSE(host.paths.traceAnalysis);
   EXPECT_EQ(host.recorder.maximumMegabytes, 256U);
   EXPECT_EQ(host.recorder.maximumAgeDays, 30U);
   EXPECT_EQ(host.limits.maximumFrameBytes, 1048576U);
@@ -45,6 +46,7 @@ refuse = "DailyLimitExceeded"
 [paths]
 diagnostic_logs = "/var/log/audio"
 flume = "/run/flume"
+trace_analysis = "/opt/analysis.so"
 [recorder]
 max_megabytes = 1
 max_age_days = 7
@@ -62,6 +64,7 @@ max_frame_bytes = 65536
   EXPECT_EQ(host.snare.refuse, platform::SnareReason::DailyLimitExceeded);
   EXPECT_EQ(host.paths.diagnosticLogs, "/var/log/audio");
   EXPECT_EQ(host.paths.flume, "/run/flume");
+  EXPECT_EQ(host.paths.traceAnalysis, "/opt/analysis.so");
   EXPECT_EQ(host.recorder.maximumMegabytes, 1U);
   EXPECT_EQ(host.recorder.maximumAgeDays, 7U);
   EXPECT_EQ(host.limits.maximumFrameBytes, 65536U);
@@ -89,6 +92,7 @@ TEST(HostConfiguration, WrongTypesAreErrorsWithTheirLine) {
   EXPECT_EQ(errorOf("[paths]\nflume = 1\n"), "c.toml:2: \"paths.flume\" must be a folder's path");
   EXPECT_EQ(errorOf("[paths]\ndiagnostic_logs = \"\"\n"),
             "c.toml:2: \"paths.diagnostic_logs\" must be a folder's path");
+  EXPECT_EQ(errorOf("[paths]\ntrace_analysis = []\n"), "c.toml:2: \"paths.trace_analysis\" must be a file's path");
   EXPECT_EQ(errorOf("[recorder]\nmax_megabytes = 1.0\n"),
             "c.toml:2: \"recorder.max_megabytes\" must be a whole number from 1 to 1048576");
 }

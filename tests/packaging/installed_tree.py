@@ -12,7 +12,8 @@ PROGRAMS = ("tarnreportingd", "tarnreportingctl")
 FILES = (
     "lib/systemd/system/tarnreportingd.service", "lib/systemd/system/tarnreportingd.socket",
     "lib/sysusers.d/tarnreporting.conf", "lib/tmpfiles.d/tarnreporting.conf",
-    "etc/tarnreporting/tarnreportingd.toml", "share/doc/tarnkit/LICENSE", "share/doc/tarnkit/README.md",
+    "etc/tarnreporting/tarnreportingd.toml",
+    "lib/tarnkit/traceanalysis.so", "share/doc/tarnkit/LICENSE", "share/doc/tarnkit/README.md",
     "share/doc/tarnkit/operations.md", "share/doc/tarnkit/wire.md",
     "include/tarnkit/client/TarnReportingClient.h", "include/tarnkit/wire/Operation.h", "include/tarnkit/plist/Value.h",
 )
@@ -61,7 +62,7 @@ class InstalledTree(unittest.TestCase):
         with open(self.at("etc/tarnreporting/tarnreportingd.toml"), encoding="utf-8") as file:
             lines = file.read().splitlines()
         keys = [line[1:] for line in lines if line.startswith("#") and not line.startswith("# ") and "=" in line]
-        self.assertEqual(len(keys), 11)
+        self.assertEqual(len(keys), 12)
         shown = os.path.join(self.folder, "shown.toml")
         with open(shown, "w", encoding="utf-8") as file:
             file.write("\n".join(line[1:] if line[1:] in keys else line for line in lines) + "\n")

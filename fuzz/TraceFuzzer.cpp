@@ -1,0 +1,50 @@
+// Bytes as a performance trace and, behind the first NUL, as descriptions of probes: they give intervals within the
+// trace or a failure, and probes of those intervals.
+#include <algorithm>
+#include <cstddef>
+#include <cstdint>
+#include <cstdlib>
+#include <string_view>
+
+#include "platform/linux/trace_analysis/ChromeTrace.h"
+#include "platform/linux/trace_analysis/Probes.h"
+
+namespace {
+
+using namespace tarn::trace_analysis;
+
+void demand(bool holds) {
+  if (!holds) {
+    std::abort();
+  }
+}
+
+void look(const std::vector<Probe>& probes, const ChromeTrace& trace) {
+  for (const Probe& probe : probes) {
+    demand(!probe.name.empty());
+    demand(probe.measuresIntervals || probe.events.empty());
+    for (const std::uint32_t event : probe.events) {
+      demand(event < trace.intervals.size());
+    }
+    look(probe.children, trace);
+  }
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+  const std::string_view input(reinterpret_cast<const char*>(data), size);
+  const std::size_t end = std::min(input.find('\0'), input.size());
+  const ReadTrace read = parseTrace(input.substr(0, end));
+  demand(read.failure.empty() || read.trace.intervals.empty());
+  std::int64_t last = INT64_MIN;
+  for (const Interval& interval : read.trace.intervals) {
+    demand(interval.duration >= 0 && interval.begin >= last);
+    demand(interval.name < read.trace.texts.size() && interval.subsystem < read.trace.texts.size());
+    last = interval.begin;
+  }
+  const ReadProbes probes = probesFor(input.substr(std::min(end + 1, input.size())), read.trace);
+  demand(probes.failure.empty() || probes.probes.empty());
+  look(probes.probes, read.trace);
+  return 0;
+}
