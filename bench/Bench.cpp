@@ -28,6 +28,7 @@ constexpr Figure kFigures[] = {
     {"memory", &measureMemory},
     {"equality", &measureEquality},
     {"growth", &measureGrowth},
+    {"signposts", &measureSignposts},
 };
 
 std::string besideThisProgram(const std::string& name) {

@@ -15,5 +15,6 @@ void measureDecoding(const Settings& settings, Table& table);
 void measureMemory(const Settings& settings, Table& table);
 void measureEquality(const Settings& settings, Table& table);
 void measureGrowth(const Settings& settings, Table& table);
+void measureSignposts(const Settings& settings, Table& table);
 
 }  // namespace tarn::bench

@@ -32,6 +32,9 @@ ROWS = [
     ("equality of two messages, unequal", ("map of variants",)),
     ("intake with 10^3 messages logged", ("",)),
     ("intake with 10^4 messages logged", ("with 10^3",)),
+    ("trace points off, intake with six more", ("without",)),
+    ("trace points off, one alone", ("an empty loop",)),
+    ("trace points on, one alone", ("off",)),
 ]
 FIGURE = re.compile(r"^\d+(\.\d+)? (us|ns|B|k/s)$")
 PEER = re.compile(r"^(?P<name>.+?) \d+(\.\d+)? (us|ns|B|k/s)( \(.*\))?$")
