@@ -242,7 +242,7 @@ class Host final : public platform::ProcessControl {
                                          .gyre = &gyre_,
                                          .performanceTrace = &performanceTrace_,
                                          .traceAnalysis = &traceAnalysis_,
-                                         .perfDataWriters = &perfDataWriters_};
+                                         .perfDataWriters = &perfDataWriters_,
                                          .signposts = &signposts_};
 };
 
