@@ -301,7 +301,11 @@ TEST_F(MemoryLogWorker, MegabytesAreCutWithALine) {
 }
 
 TEST_F(MemoryLogWorker, MegabytesThatNobodyKeepsAreReadWithinABoundToo) {
-  const std::string noise(Worker::kMostBytesRead, '\n');
+  constexpr std::size_t kLine = 1024;
+  std::string noise;
+  while (noise.size() < Worker::kMostBytesRead) {
+    noise.append(kLine - 1, 'x').append(1, '\n');
+  }
   EXPECT_TRUE(blocksOf(kResources, noise).empty());
   EXPECT_EQ(notes().size(), 4U);  // as much as is read, and nothing was cut
   EXPECT_TRUE(blocksOf(kResources, noise + "RESOURCE\n").empty());

@@ -5,9 +5,9 @@
 #include <algorithm>
 #include <atomic>
 #include <fstream>
+#include <future>
 #include <map>
 #include <memory>
-#include <mutex>
 #include <string>
 #include <thread>
 #include <vector>
@@ -54,7 +54,7 @@ class StandInRunner final : public platform::CommandRunner {
 };
 
 class MemoryLogThreads : public ::testing::Test {
- protected:
+ public:
   MemoryLogThreads() {
     static int tests = 0;  // the limiter is the process's
     platform_.clock.setMonotonic(std::chrono::hours(++tests));
@@ -69,6 +69,7 @@ class MemoryLogThreads : public ::testing::Test {
     TarnReportingSession::setAllWorkerClasses({});
   }
 
+ protected:
   void standIn(const char* tool, const std::string& command) { runner_.standIns[tool] = command; }
   // Begins a request by a session of its own and does not wait for its end.
   void beginRequest() {
@@ -202,23 +203,23 @@ TEST_F(MemoryLogThreads, RequestsOfManySessionsAreServedOneByOne) {
 
 TEST_F(MemoryLogThreads, OneFreeThreadIsEnough) {
   // Three queues of others are blocked for as long as the request lasts: the tools run one after the other.
-  std::mutex held;
-  std::atomic<std::size_t> blocked{0};
+  std::promise<void> release;
+  const auto released = release.get_future().share();
+  const auto blocked = std::make_shared<std::atomic<std::size_t>>(0);
   std::vector<std::shared_ptr<platform::WorkQueue>> others;
-  held.lock();
   for (std::size_t i = 0; i + 1 < LinuxWorkQueues::kThreads; ++i) {
     others.push_back(queues_.makeSerialQueue("another's", platform::QualityOfService::Utility));
-    others.back()->async([&] {
-      ++blocked;
-      const std::lock_guard lock(held);
+    others.back()->async([blocked, released] {
+      ++*blocked;
+      released.wait();
     });
   }
-  EXPECT_TRUE(testing::eventually([&] { return blocked == LinuxWorkQueues::kThreads - 1; }));
+  EXPECT_TRUE(testing::eventually([&] { return *blocked == LinuxWorkQueues::kThreads - 1; }));
   standIn(kZones, "echo zone");
   standIn(kResources, "echo RESOURCE");
   request();
   EXPECT_EQ(platform_.log.count("WIRED LOG BLOCK 1\n"), 2U);
-  held.unlock();
+  release.set_value();
 }
 
 TEST_F(MemoryLogThreads, TheWaitIsToldToTheWatchdogAsDeliberate) {
