@@ -118,6 +118,25 @@ bool equalWithSameKeys(const Body& a, const Body& b, std::span<const Key> ignore
   return true;
 }
 
+// The list with these keys behind it. One or two are what bursts of settings bring, over and over: such a list
+// remembers how it was extended.
+KeyList keysWith(KeyList list, std::span<const Key* const> added) {
+  constexpr std::size_t kFew = 2;
+  if (added.size() <= kFew) {
+    for (const Key* key : added) {
+      list = list.appending(*key);
+    }
+    return list;
+  }
+  std::vector<const Key*> all;
+  all.reserve(list.size() + added.size());
+  for (std::size_t i = 0; i < list.size(); ++i) {
+    all.push_back(&list[i]);
+  }
+  all.insert(all.end(), added.begin(), added.end());
+  return *KeyList::make(std::span<const Key* const>(all));
+}
+
 bool equalWithOtherKeys(const Body& a, const Body& b, std::span<const Key> ignored) {
   const auto counted = [&](const detail::KeyListBody& list) {
     std::size_t count = list.count;
@@ -155,16 +174,16 @@ Dictionary::Dictionary(std::initializer_list<Member> members) : body_(nullptr) {
 }
 
 Dictionary Dictionary::fromEntries(std::span<const Entry> entries) {
-  std::vector<Key> keys;
+  std::vector<const Key*> keys;
   keys.reserve(entries.size());
   std::size_t bytes = 0;
   bool containers = false;
   for (const Entry& entry : entries) {
-    keys.push_back(entry.key);
+    keys.push_back(&entry.key);
     bytes += Packed::sizeOf(entry.value);
     containers = containers || isContainer(entry.value);
   }
-  std::optional<KeyList> list = KeyList::make(std::span<const Key>(keys));
+  std::optional<KeyList> list = KeyList::make(std::span<const Key* const>(keys));
   if (!list || list->empty()) {
     return {};
   }
@@ -215,6 +234,14 @@ ValueView Dictionary::get(const Key& key) const noexcept {
 ValueView Dictionary::get(std::string_view key) const noexcept {
   const std::size_t index = body_ == nullptr ? KeyList::npos : detail::indexInKeyList(body_->keys, key);
   return index == KeyList::npos ? ValueView() : Packed::read(itemAt(*body_, index));
+}
+
+bool Dictionary::contains(const Key& key) const noexcept {
+  return body_ != nullptr && detail::indexInKeyList(body_->keys, key) != KeyList::npos;
+}
+
+bool Dictionary::contains(std::string_view key) const noexcept {
+  return body_ != nullptr && detail::indexInKeyList(body_->keys, key) != KeyList::npos;
 }
 
 // Replaces `removed` bytes at `offset` by the packed value. A block that is shared is copied; a container that goes is
@@ -309,20 +336,46 @@ void Dictionary::merge(const Dictionary& other) {
     *this = other;
     return;
   }
-  const std::vector<std::uint32_t> offsets = offsetsOf(*other.body_);
-  std::vector<Entry> entries;
-  entries.reserve(size() + other.size());
-  for (const Entry& own : *this) {
-    const std::size_t index = detail::indexInKeyList(other.body_->keys, own.key);
-    entries.push_back(
-        {own.key, index == KeyList::npos ? own.value : Packed::read(other.body_->data() + offsets[index])});
+  if (body_->keys == other.body_->keys) {
+    *this = other;  // a value for every key
+    return;
   }
-  for (const Entry& added : other) {
-    if (detail::indexInKeyList(body_->keys, added.key) == KeyList::npos) {
-      entries.push_back(added);
+  // Values are moved as they are packed, from whichever side they stay on.
+  const std::vector<std::uint32_t> offsets = offsetsOf(*other.body_);
+  std::vector<const std::byte*> values;
+  values.reserve(size() + other.size());
+  std::size_t bytes = 0;
+  const auto take = [&](const std::byte* at) {
+    values.push_back(at);
+    bytes += Packed::sizeAt(at);
+  };
+  const Key* key = body_->keys->keys();
+  for (const std::byte* at = body_->data(); at != body_->end(); at += Packed::sizeAt(at)) {
+    const std::size_t index = detail::indexInKeyList(other.body_->keys, *key++);
+    take(index == KeyList::npos ? at : other.body_->data() + offsets[index]);
+  }
+  std::vector<const Key*> added;
+  for (std::size_t i = 0; i < offsets.size(); ++i) {
+    const Key& each = other.body_->keys->keys()[i];
+    if (detail::indexInKeyList(body_->keys, each) == KeyList::npos) {
+      take(other.body_->data() + offsets[i]);
+      added.push_back(&each);
     }
   }
-  *this = fromEntries(entries);
+  KeyList list = keysWith(keys(), added);
+  Body* merged = detail::makeBody(bytes);
+  merged->holdsContainers = body_->holdsContainers | other.body_->holdsContainers;
+  merged->keys = std::exchange(list.body_, nullptr);
+  std::byte* to = merged->data();
+  for (const std::byte* at : values) {
+    const std::size_t size = Packed::sizeAt(at);
+    std::memcpy(to, at, size);
+    to += size;
+  }
+  if (merged->holdsContainers != 0) {
+    detail::retainContainers(merged->data(), merged->end());
+  }
+  *this = Dictionary(merged);
 }
 
 Dictionary::Iterator Dictionary::begin() const noexcept {
@@ -365,6 +418,14 @@ bool Dictionary::equalsIgnoring(const Dictionary& other, std::span<const Key> ig
 bool Dictionary::sharesKeysWith(const Dictionary& other) const noexcept {
   const auto listOf = [](const Body* body) { return body == nullptr ? nullptr : body->keys; };
   return listOf(body_) == listOf(other.body_);
+}
+
+bool Dictionary::hasKeys(const KeyList& keys) const noexcept {
+  return (body_ == nullptr ? nullptr : body_->keys) == keys.body_;
+}
+
+std::uint64_t Dictionary::keysHash() const noexcept {
+  return body_ == nullptr ? 0 : body_->keys->hash;
 }
 
 std::size_t Dictionary::storageBytes() const noexcept {

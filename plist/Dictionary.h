@@ -92,10 +92,9 @@ class Dictionary {
   ValueView operator[](const AnyKey& key) const noexcept {
     return get(key);
   }
-  template <class AnyKey>
-  bool contains(const AnyKey& key) const noexcept {
-    return get(key).present();
-  }
+  bool contains(const Key& key) const noexcept;
+  bool contains(std::string_view key) const noexcept;
+  bool contains(const char* key) const noexcept { return contains(std::string_view(key)); }
 
   // Stores a value: in the place that the key has, else behind all others. An absent value is not stored.
   // `value` may look into this very dictionary.
@@ -116,6 +115,10 @@ class Dictionary {
   bool sharesStorageWith(const Dictionary& other) const noexcept { return body_ == other.body_; }
   // Whether both have the same keys in the same order.
   bool sharesKeysWith(const Dictionary& other) const noexcept;
+  // Whether its keys are exactly these in this order.
+  bool hasKeys(const KeyList& keys) const noexcept;
+  // The hash of its key list (KeyList::hash), 0 of an empty one.
+  std::uint64_t keysHash() const noexcept;
   // Bytes held by this dictionary and, counted at each place, by the containers in it; without the key lists.
   std::size_t storageBytes() const noexcept;
 

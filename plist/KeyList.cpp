@@ -111,21 +111,30 @@ KeyListBody* makeBody(std::span<const Key> head, const Key* last, std::uint64_t 
   return body;
 }
 
-// The list of `head` and, unless null, `last` behind it, found or made, with one more reference.
-KeyListBody* internList(std::span<const Key> head, const Key* last, std::uint64_t hash) {
-  const std::size_t count = head.size() + (last != nullptr ? 1 : 0);
-  const auto matches = [&](const KeyListBody& body) {
-    return body.count == count && std::equal(head.begin(), head.end(), body.keys()) &&
-           (last == nullptr || body.keys()[count - 1] == *last);
-  };
-  Table& all = table();
-  const std::lock_guard lock(all.mutex);
-  const auto [begin, end] = all.lists.equal_range(hash);
+// The list of this hash that matches, with one more reference; null when there is none. The table is locked.
+template <class Matches>
+KeyListBody* findList(const Table& locked, std::uint64_t hash, const Matches& matches) {
+  const auto [begin, end] = locked.lists.equal_range(hash);
   for (auto found = begin; found != end; ++found) {
     if (matches(*found->second)) {
       found->second->references.fetch_add(1, std::memory_order_relaxed);
       return found->second;
     }
+  }
+  return nullptr;
+}
+
+// The list of `head` and, unless null, `last` behind it, found or made, with one more reference.
+KeyListBody* internList(std::span<const Key> head, const Key* last, std::uint64_t hash) {
+  const std::size_t count = head.size() + (last != nullptr ? 1 : 0);
+  Table& all = table();
+  const std::lock_guard lock(all.mutex);
+  KeyListBody* const found = findList(all, hash, [&](const KeyListBody& body) {
+    return body.count == count && std::equal(head.begin(), head.end(), body.keys()) &&
+           (last == nullptr || body.keys()[count - 1] == *last);
+  });
+  if (found != nullptr) {
+    return found;
   }
   KeyListBody* made = makeBody(head, last, hash);
   all.lists.emplace(hash, made);
@@ -208,6 +217,29 @@ std::optional<KeyList> KeyList::make(std::span<const Key> keys) {
     return std::nullopt;
   }
   return KeyList(internList(keys, nullptr, hashOfKeys(keys)));
+}
+
+std::optional<KeyList> KeyList::make(std::span<const Key* const> keys) {
+  std::uint64_t hash = 0;
+  for (const Key* key : keys) {
+    hash = combineHash(hash, key->hash());
+  }
+  // Nearly always it is there. A list that is there repeats nothing, and is found without counting its keys once more.
+  const auto matches = [&](const detail::KeyListBody& body) {
+    return body.count == keys.size() && std::equal(keys.begin(), keys.end(), body.keys(),
+                                                   [](const Key* key, const Key& other) { return *key == other; });
+  };
+  Table& all = table();
+  {
+    const std::lock_guard lock(all.mutex);
+    if (detail::KeyListBody* const found = findList(all, hash, matches)) {
+      return KeyList(found);
+    }
+  }
+  std::vector<Key> held;
+  held.reserve(keys.size());
+  std::transform(keys.begin(), keys.end(), std::back_inserter(held), [](const Key* key) { return *key; });
+  return make(std::span<const Key>(held));
 }
 
 std::size_t KeyList::size() const noexcept {

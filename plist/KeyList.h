@@ -34,6 +34,7 @@ class KeyList {
   // The list of these keys, or nothing when one of them stands there twice.
   static std::optional<KeyList> make(std::span<const std::string_view> texts);
   static std::optional<KeyList> make(std::span<const Key> keys);
+  static std::optional<KeyList> make(std::span<const Key* const> keys);
 
   std::size_t size() const noexcept;
   bool empty() const noexcept { return body_ == nullptr; }

@@ -128,6 +128,61 @@ TEST(Dictionary, MergeReplacesInPlaceAndAppendsInOrder) {
   EXPECT_EQ(empty, dictionary);
 }
 
+TEST(Dictionary, MergeOfTheSameKeysTakesTheOthersValues) {
+  Dictionary dictionary{{"a", 1}, {"b", "text"}};
+  const Dictionary before = dictionary;
+  dictionary.merge({{"a", 2.5}, {"b", Array{1}}});
+  EXPECT_EQ(dictionary, (Dictionary{{"a", 2.5}, {"b", Array{1}}}));
+  EXPECT_EQ(before, (Dictionary{{"a", 1}, {"b", "text"}}));
+}
+
+TEST(Dictionary, MergeKeepsTheContainersOfBothSides) {
+  Dictionary merged;
+  {
+    Dictionary left{{"kept", Array{1, "two"}}, {"replaced", Array{3}}, {"n", 1}};
+    const Dictionary right{{"replaced", Dictionary{{"x", Array{4}}}}, {"added", Array{5}}};
+    left.merge(right);
+    merged = left;
+  }
+  EXPECT_EQ(merged["kept"].array(), (Array{1, "two"}));
+  EXPECT_EQ(merged["replaced"].dictionary(), (Dictionary{{"x", Array{4}}}));
+  EXPECT_EQ(merged["added"].array(), Array{5});
+  EXPECT_EQ(keysOf(merged), (std::vector<std::string>{"kept", "replaced", "n", "added"}));
+}
+
+TEST(Dictionary, MergeAddsAnyNumberOfKeysInTheirOrder) {
+  for (int count = 0; count <= 40; ++count) {
+    Dictionary dictionary{{"first", 1}, {"second", 2}};
+    Dictionary added{{"second", "new"}};
+    for (int i = 0; i < count; ++i) {
+      added.set(Key("added " + std::to_string(i)), i);
+    }
+    Dictionary expected{{"first", 1}, {"second", "new"}};
+    for (int i = 0; i < count; ++i) {
+      expected.set(Key("added " + std::to_string(i)), i);
+    }
+    dictionary.merge(added);
+    EXPECT_TRUE(dictionary.sharesKeysWith(expected)) << count;
+    EXPECT_EQ(dictionary, expected) << count;
+  }
+}
+
+TEST(Dictionary, TellsWhichKeysItHas) {
+  const Dictionary dictionary{{"a", 1}, {"b", 2}};
+  EXPECT_TRUE(dictionary.contains("a"));
+  EXPECT_TRUE(dictionary.contains(Key("b")));
+  EXPECT_FALSE(dictionary.contains("c"));
+  EXPECT_FALSE(dictionary.contains(Key("c")));
+  EXPECT_FALSE(Dictionary().contains("a"));
+  EXPECT_TRUE(dictionary.hasKeys(dictionary.keys()));
+  EXPECT_TRUE(dictionary.hasKeys((Dictionary{{"a", "x"}, {"b", "y"}}.keys())));
+  EXPECT_FALSE(dictionary.hasKeys((Dictionary{{"b", 2}, {"a", 1}}.keys())));
+  EXPECT_FALSE(dictionary.hasKeys(KeyList()));
+  EXPECT_TRUE(Dictionary().hasKeys(KeyList()));
+  EXPECT_EQ(dictionary.keysHash(), dictionary.keys().hash());
+  EXPECT_EQ(Dictionary().keysHash(), KeyList().hash());
+}
+
 TEST(Dictionary, ThousandsOfKeysAreFoundAndMerged) {
   Dictionary left;
   Dictionary right;
