@@ -8,10 +8,14 @@
 // Threads: the server queue.
 #pragma once
 
+#include <algorithm>
 #include <array>
 #include <cstddef>
+#include <vector>
 
+#include "plist/Dictionary.h"
 #include "plist/Key.h"
+#include "plist/KeyList.h"
 #include "plist/ValueView.h"
 
 namespace tarn {
@@ -46,6 +50,60 @@ class TarnReportingMessageFields {
 
  private:
   std::array<plist::ValueView, kCount> values_;
+};
+
+// TarnReportingMessageFieldReader: reads the fields of one payload after the other.
+//
+// Messages come in a few shapes over and over. Where the fields lie in a key list is remembered, for a bounded number
+// of lists, so that a payload is passed over once and only as far as its last field, and no key is looked for.
+//
+// `keys` outlives the reader. Threads: the server queue.
+template <class Field>
+class TarnReportingMessageFieldReader {
+ public:
+  using Fields = TarnReportingMessageFields<Field>;
+
+  explicit TarnReportingMessageFieldReader(const typename Fields::Keys& keys) : keys_(keys) {}
+
+  Fields read(const plist::Dictionary& payload) {
+    Fields fields;
+    auto entry = payload.begin();
+    for (const std::size_t field : placesIn(payload)) {
+      if (field != Fields::kCount) {
+        fields[static_cast<Field>(field)] = (*entry).value;
+      }
+      ++entry;
+    }
+    return fields;
+  }
+
+ private:
+  // The field at each place of a key list, Count for none, up to the last place that has one.
+  using Places = std::vector<std::size_t>;
+  struct Shape {
+    plist::KeyList keys;
+    Places places;
+  };
+
+  static constexpr std::size_t kSlots = 128;
+
+  const Places& placesIn(const plist::Dictionary& payload) {
+    Shape& slot = slots_[payload.keysHash() % kSlots];
+    if (!payload.hasKeys(slot.keys)) {
+      slot = {payload.keys(), {}};
+      for (std::size_t place = 0; place < slot.keys.size(); ++place) {
+        const auto field = std::find(keys_.begin(), keys_.end(), slot.keys[place]);
+        if (field != keys_.end()) {
+          slot.places.resize(place, Fields::kCount);
+          slot.places.push_back(static_cast<std::size_t>(field - keys_.begin()));
+        }
+      }
+    }
+    return slot.places;
+  }
+
+  const typename Fields::Keys& keys_;
+  std::vector<Shape> slots_ = std::vector<Shape>(kSlots);  // by the key list's hash
 };
 
 }  // namespace tarn

@@ -83,6 +83,7 @@ class InputWalk {
 
   const std::string_view process_;
   const double minimumRunningtime_;
+  TarnReportingMessageFieldReader<Field> reader_{kKeys};
   Fields state_;
   bool running_ = false;
   TarnReportingSegmentClock clock_;
@@ -91,7 +92,7 @@ class InputWalk {
 };
 
 void InputWalk::take(const plist::Dictionary& payload) {
-  const Fields message(kKeys, payload);
+  const Fields message = reader_.read(payload);
   const plist::ValueView& time = message[Field::Timestamp];
   const bool wasRunning = state_[Field::Running].asBool();
   const bool hasEnd = message[Field::Duration].present();

@@ -105,6 +105,7 @@ class LagoonWalk {
 
   const double minimumPlaytime_;
   const Fields defaults_ = defaultValues();
+  TarnReportingMessageFieldReader<Field> reader_{kKeys};
   Fields state_;
   bool running_;
   bool inGroup_;
@@ -123,7 +124,7 @@ LagoonWalk::LagoonWalk(const TarnReportingSessionPreviousValues& previousValues,
 }
 
 void LagoonWalk::take(const plist::Dictionary& payload) {
-  const Fields message(kKeys, payload);
+  const Fields message = reader_.read(payload);
   const plist::ValueView& time = message[Field::Timestamp];
   const plist::ValueView& group = message[Field::GroupSession];
   const plist::ValueView& running = message[Field::Running];

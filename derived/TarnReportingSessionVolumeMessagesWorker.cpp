@@ -89,6 +89,7 @@ class VolumeWalk {
 
   const std::string_view process_;
   const double minimumPlaytime_;
+  TarnReportingMessageFieldReader<Field> reader_{kKeys};
   Fields state_;
   bool running_ = false;
   TarnReportingSegmentClock clock_;
@@ -107,7 +108,7 @@ VolumeWalk::VolumeWalk(const TarnReportingSessionPreviousValues& previousValues,
 }
 
 void VolumeWalk::take(const plist::Dictionary& payload) {
-  const Fields message(kKeys, payload);
+  const Fields message = reader_.read(payload);
   const plist::ValueView& time = message[Field::Timestamp];
   const bool wasRunning = state_[Field::Running].asBool();
   const bool hasEnd = message[Field::Duration].present();
