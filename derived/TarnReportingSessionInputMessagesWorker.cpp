@@ -5,6 +5,7 @@
 #include <string>
 #include <vector>
 
+#include "derived/TarnReportingDerivation.h"
 #include "derived/TarnReportingMessageFields.h"
 #include "derived/TarnReportingSegments.h"
 #include "service/TarnReportingLog.h"
@@ -196,11 +197,7 @@ TarnReportingSessionMessages TarnReportingSessionInputMessagesWorker::createInpu
                    kOperation);
   const TarnReportingSessionMessages combined =
       TarnReportingSessionWorkerUtility::combineRapidMessages(messages, kKeysToCombine, kMaximumPauseSeconds);
-  InputWalk walk(previousValues, process, minimumRunningtime);
-  for (const auto& message : combined) {
-    walk.take(message->message());
-  }
-  return walk.finish();
+  return TarnReportingDerivedMessages(combined, InputWalk(previousValues, process, minimumRunningtime));
 }
 
 std::unique_ptr<TarnReportingSessionInputMessagesWorker> TarnReportingSessionInputMessagesWorker::initWithSession(
@@ -209,21 +206,12 @@ std::unique_ptr<TarnReportingSessionInputMessagesWorker> TarnReportingSessionInp
 }
 
 void TarnReportingSessionInputMessagesWorker::stop() {
-  const std::shared_ptr<TarnReportingSession> owner = session();
-  if (!owner || owner->messages().empty()) {
-    return;
-  }
-  const TarnReportingSessionMessages derived = createInputMessages(
-      owner->messages(), owner->previousValues(), TarnReportingUtilityRetrieveAppName(owner->configuration()),
-      TarnReportingUtilityVolumeMinimumPlayingTime(owner->serviceType()));
-  if (derived.empty()) {
-    return;
-  }
-  TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Default, kModule,
-                   "sending input summary event for reporter %lli", owner->reporterID());
-  for (const auto& message : derived) {
-    owner->sendMessage(message);
-  }
+  TarnReportingSendDerivedMessages(
+      session(), kModule, "sending input summary event for reporter %lli", [](const TarnReportingSession& owner) {
+        return createInputMessages(owner.messages(), owner.previousValues(),
+                                   TarnReportingUtilityRetrieveAppName(owner.configuration()),
+                                   TarnReportingUtilityVolumeMinimumPlayingTime(owner.serviceType()));
+      });
 }
 
 }  // namespace tarn

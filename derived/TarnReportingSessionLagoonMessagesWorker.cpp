@@ -4,6 +4,7 @@
 #include <initializer_list>
 #include <string>
 
+#include "derived/TarnReportingDerivation.h"
 #include "derived/TarnReportingMessageFields.h"
 #include "derived/TarnReportingSegments.h"
 #include "service/TarnReportingLog.h"
@@ -203,11 +204,7 @@ TarnReportingSessionMessages TarnReportingSessionLagoonMessagesWorker::createLag
     double minimumPlaytime) {
   TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, kModule, "entering createLagoonMessages %s",
                    kOperation);
-  LagoonWalk walk(previousValues, minimumPlaytime);
-  for (const auto& message : messages) {
-    walk.take(message->message());
-  }
-  return walk.finish();
+  return TarnReportingDerivedMessages(messages, LagoonWalk(previousValues, minimumPlaytime));
 }
 
 std::unique_ptr<TarnReportingSessionLagoonMessagesWorker> TarnReportingSessionLagoonMessagesWorker::initWithSession(
@@ -216,20 +213,11 @@ std::unique_ptr<TarnReportingSessionLagoonMessagesWorker> TarnReportingSessionLa
 }
 
 void TarnReportingSessionLagoonMessagesWorker::stop() {
-  const std::shared_ptr<TarnReportingSession> owner = session();
-  if (!owner || owner->messages().empty()) {
-    return;
-  }
-  const TarnReportingSessionMessages derived = createLagoonMessages(
-      owner->messages(), owner->previousValues(), TarnReportingUtilityVolumeMinimumPlayingTime(owner->serviceType()));
-  if (derived.empty()) {
-    return;
-  }
-  TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Default, kModule, "sending lagoon event for reporter %lli",
-                   owner->reporterID());
-  for (const auto& message : derived) {
-    owner->sendMessage(message);
-  }
+  TarnReportingSendDerivedMessages(
+      session(), kModule, "sending lagoon event for reporter %lli", [](const TarnReportingSession& owner) {
+        return createLagoonMessages(owner.messages(), owner.previousValues(),
+                                    TarnReportingUtilityVolumeMinimumPlayingTime(owner.serviceType()));
+      });
 }
 
 }  // namespace tarn

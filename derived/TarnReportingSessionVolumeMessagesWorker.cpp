@@ -3,6 +3,7 @@
 #include <array>
 #include <string>
 
+#include "derived/TarnReportingDerivation.h"
 #include "derived/TarnReportingMessageFields.h"
 #include "derived/TarnReportingSegments.h"
 #include "service/TarnReportingLog.h"
@@ -198,11 +199,7 @@ TarnReportingSessionMessages TarnReportingSessionVolumeMessagesWorker::createVol
                    kOperation);
   const TarnReportingSessionMessages combined =
       TarnReportingSessionWorkerUtility::combineRapidMessages(messages, kKeysToCombine, kMaximumPauseSeconds);
-  VolumeWalk walk(previousValues, process, minimumPlaytime);
-  for (const auto& message : combined) {
-    walk.take(message->message());
-  }
-  return walk.finish();
+  return TarnReportingDerivedMessages(combined, VolumeWalk(previousValues, process, minimumPlaytime));
 }
 
 std::unique_ptr<TarnReportingSessionVolumeMessagesWorker> TarnReportingSessionVolumeMessagesWorker::initWithSession(
@@ -211,21 +208,12 @@ std::unique_ptr<TarnReportingSessionVolumeMessagesWorker> TarnReportingSessionVo
 }
 
 void TarnReportingSessionVolumeMessagesWorker::stop() {
-  const std::shared_ptr<TarnReportingSession> owner = session();
-  if (!owner || owner->messages().empty()) {
-    return;
-  }
-  const TarnReportingSessionMessages derived = createVolumeMessages(
-      owner->messages(), owner->previousValues(), TarnReportingUtilityRetrieveAppName(owner->configuration()),
-      TarnReportingUtilityVolumeMinimumPlayingTime(owner->serviceType()));
-  if (derived.empty()) {
-    return;
-  }
-  TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Default, kModule, "sending volume event for reporter %lli",
-                   owner->reporterID());
-  for (const auto& message : derived) {
-    owner->sendMessage(message);
-  }
+  TarnReportingSendDerivedMessages(
+      session(), kModule, "sending volume event for reporter %lli", [](const TarnReportingSession& owner) {
+        return createVolumeMessages(owner.messages(), owner.previousValues(),
+                                    TarnReportingUtilityRetrieveAppName(owner.configuration()),
+                                    TarnReportingUtilityVolumeMinimumPlayingTime(owner.serviceType()));
+      });
 }
 
 }  // namespace tarn
