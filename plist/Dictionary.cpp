@@ -41,33 +41,6 @@ bool isContainer(const ValueView& value) noexcept {
   return value.kind() == Kind::Array || value.kind() == Kind::Dictionary;
 }
 
-// Offsets of all values, for readers that jump about in a long dictionary.
-std::vector<std::uint32_t> offsetsOf(const Body& body) {
-  std::vector<std::uint32_t> offsets;
-  for (const std::byte* at = body.data(); at != body.end(); at += Packed::sizeAt(at)) {
-    offsets.push_back(static_cast<std::uint32_t>(at - body.data()));
-  }
-  return offsets;
-}
-
-// Where the two runs of bytes first differ, `size` when they don't.
-std::size_t firstDifference(const std::byte* a, const std::byte* b, std::size_t size) noexcept {
-  std::size_t at = 0;
-  for (; at + 8 <= size; at += 8) {
-    std::uint64_t wordA = 0;
-    std::uint64_t wordB = 0;
-    std::memcpy(&wordA, a + at, 8);
-    std::memcpy(&wordB, b + at, 8);
-    if (wordA != wordB) {
-      return at + static_cast<std::size_t>(__builtin_ctzll(wordA ^ wordB)) / 8;
-    }
-  }
-  while (at < size && a[at] == b[at]) {
-    ++at;
-  }
-  return at;
-}
-
 std::size_t storageBytesBehind(const ValueView& value) noexcept {
   switch (value.kind()) {
     case Kind::Dictionary:
@@ -77,45 +50,6 @@ std::size_t storageBytesBehind(const ValueView& value) noexcept {
     default:
       return 0;
   }
-}
-
-bool isIgnored(const Key& key, std::span<const Key> ignored) noexcept {
-  return std::find(ignored.begin(), ignored.end(), key) != ignored.end();
-}
-
-// Two dictionaries of one key list: ignored values are passed over unseen, equal bytes many at a time, and only the
-// values that hold a difference are looked at.
-bool equalWithSameKeys(const Body& a, const Body& b, std::span<const Key> ignored) noexcept {
-  const Key* key = a.keys->keys();
-  const std::byte* atA = a.data();
-  const std::byte* atB = b.data();
-  while (atA != a.end()) {
-    if (isIgnored(*key, ignored)) {
-      atA += Packed::sizeAt(atA);
-      atB += Packed::sizeAt(atB);
-      ++key;
-      continue;
-    }
-    const auto left = static_cast<std::size_t>(std::min(a.end() - atA, b.end() - atB));
-    if (a.end() - atA == b.end() - atB && std::memcmp(atA, atB, left) == 0) {
-      return true;
-    }
-    // Values that are equal byte for byte end together, so the difference lies before either end.
-    const std::byte* const differing = atA + firstDifference(atA, atB, left);
-    std::size_t size = Packed::sizeAt(atA);
-    for (; atA + size <= differing; size = Packed::sizeAt(atA)) {
-      atA += size;
-      atB += size;
-      ++key;
-    }
-    if (!isIgnored(*key, ignored) && !(Packed::read(atA) == Packed::read(atB))) {
-      return false;
-    }
-    atA += size;
-    atB += Packed::sizeAt(atB);
-    ++key;
-  }
-  return true;
 }
 
 // The list with these keys behind it. One or two are what bursts of settings bring, over and over: such a list
@@ -137,32 +71,24 @@ KeyList keysWith(KeyList list, std::span<const Key* const> added) {
   return *KeyList::make(std::span<const Key* const>(all));
 }
 
-bool equalWithOtherKeys(const Body& a, const Body& b, std::span<const Key> ignored) {
-  const auto counted = [&](const detail::KeyListBody& list) {
-    std::size_t count = list.count;
-    for (const Key& key : ignored) {
-      if (detail::indexInKeyList(&list, key) != KeyList::npos) {
-        --count;
-      }
-    }
-    return count;
-  };
-  if (counted(*a.keys) != counted(*b.keys)) {
-    return false;
+// A block of these values, copied as they are packed, without a key list.
+Body* bodyOfPacked(std::span<const std::byte* const> values, bool holdsContainers) {
+  std::size_t bytes = 0;
+  for (const std::byte* at : values) {
+    bytes += Packed::sizeAt(at);
   }
-  const std::vector<std::uint32_t> offsets = offsetsOf(b);
-  std::size_t index = 0;
-  for (const std::byte* at = a.data(); at != a.end(); at += Packed::sizeAt(at)) {
-    const Key& key = a.keys->keys()[index++];
-    if (isIgnored(key, ignored)) {
-      continue;
-    }
-    const std::size_t position = detail::indexInKeyList(b.keys, key);
-    if (position == KeyList::npos || !(Packed::read(at) == Packed::read(b.data() + offsets[position]))) {
-      return false;
-    }
+  Body* body = detail::makeBody(bytes);
+  std::byte* to = body->data();
+  for (const std::byte* at : values) {
+    const std::size_t size = Packed::sizeAt(at);
+    std::memcpy(to, at, size);
+    to += size;
   }
-  return true;
+  if (holdsContainers) {
+    body->holdsContainers = 1;
+    detail::retainContainers(body->data(), body->end());
+  }
+  return body;
 }
 
 }  // namespace
@@ -340,41 +266,29 @@ void Dictionary::merge(const Dictionary& other) {
     *this = other;  // a value for every key
     return;
   }
-  // Values are moved as they are packed, from whichever side they stay on.
-  const std::vector<std::uint32_t> offsets = offsetsOf(*other.body_);
+  std::vector<const std::byte*> theirs;
+  theirs.reserve(other.size());
+  for (const std::byte* at = other.body_->data(); at != other.body_->end(); at += Packed::sizeAt(at)) {
+    theirs.push_back(at);
+  }
   std::vector<const std::byte*> values;
   values.reserve(size() + other.size());
-  std::size_t bytes = 0;
-  const auto take = [&](const std::byte* at) {
-    values.push_back(at);
-    bytes += Packed::sizeAt(at);
-  };
   const Key* key = body_->keys->keys();
   for (const std::byte* at = body_->data(); at != body_->end(); at += Packed::sizeAt(at)) {
     const std::size_t index = detail::indexInKeyList(other.body_->keys, *key++);
-    take(index == KeyList::npos ? at : other.body_->data() + offsets[index]);
+    values.push_back(index == KeyList::npos ? at : theirs[index]);
   }
   std::vector<const Key*> added;
-  for (std::size_t i = 0; i < offsets.size(); ++i) {
+  for (std::size_t i = 0; i < theirs.size(); ++i) {
     const Key& each = other.body_->keys->keys()[i];
     if (detail::indexInKeyList(body_->keys, each) == KeyList::npos) {
-      take(other.body_->data() + offsets[i]);
+      values.push_back(theirs[i]);
       added.push_back(&each);
     }
   }
   KeyList list = keysWith(keys(), added);
-  Body* merged = detail::makeBody(bytes);
-  merged->holdsContainers = body_->holdsContainers | other.body_->holdsContainers;
+  Body* const merged = bodyOfPacked(values, (body_->holdsContainers | other.body_->holdsContainers) != 0);
   merged->keys = std::exchange(list.body_, nullptr);
-  std::byte* to = merged->data();
-  for (const std::byte* at : values) {
-    const std::size_t size = Packed::sizeAt(at);
-    std::memcpy(to, at, size);
-    to += size;
-  }
-  if (merged->holdsContainers != 0) {
-    detail::retainContainers(merged->data(), merged->end());
-  }
   *this = Dictionary(merged);
 }
 
@@ -401,18 +315,6 @@ Dictionary::Iterator& Dictionary::Iterator::operator++() noexcept {
   at_ += Packed::sizeAt(at_);
   ++key_;
   return *this;
-}
-
-bool Dictionary::equalsIgnoring(const Dictionary& other, std::span<const Key> ignored) const noexcept {
-  if (body_ == other.body_) {
-    return true;
-  }
-  if (body_ == nullptr || other.body_ == nullptr) {
-    const Dictionary& one = body_ == nullptr ? other : *this;
-    return std::all_of(one.begin(), one.end(), [&](const Entry& entry) { return isIgnored(entry.key, ignored); });
-  }
-  return body_->keys == other.body_->keys ? equalWithSameKeys(*body_, *other.body_, ignored)
-                                          : equalWithOtherKeys(*body_, *other.body_, ignored);
 }
 
 bool Dictionary::sharesKeysWith(const Dictionary& other) const noexcept {
