@@ -29,6 +29,7 @@ constexpr Figure kFigures[] = {
     {"equality", &measureEquality},
     {"growth", &measureGrowth},
     {"signposts", &measureSignposts},
+    {"stop", &measureStop},
 };
 
 std::string besideThisProgram(const std::string& name) {

@@ -16,5 +16,6 @@ void measureMemory(const Settings& settings, Table& table);
 void measureEquality(const Settings& settings, Table& table);
 void measureGrowth(const Settings& settings, Table& table);
 void measureSignposts(const Settings& settings, Table& table);
+void measureStop(const Settings& settings, Table& table);
 
 }  // namespace tarn::bench

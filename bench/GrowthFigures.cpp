@@ -9,6 +9,7 @@
 #include "bench/Intake.h"
 #include "bench/Measure.h"
 #include "bench/Processes.h"
+#include "bench/SessionPlatform.h"
 
 namespace tarn::bench {
 
@@ -19,7 +20,7 @@ constexpr double kTarget = 1.2;
 // One session's way through all lengths, in a process as fresh as the service is.
 std::vector<double> measureLengths(const std::vector<std::size_t>& lengths) {
   ::malloc_trim(0);  // what this program freed before must not serve again
-  const IntakePlatform platform;
+  const SessionPlatform platform(Tally::WantsNothing);
   const auto warm = makeSession();
   Feeder(*warm).fillTo(10 * Feeder::kWindow);
   const auto session = makeSession();

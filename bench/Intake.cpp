@@ -1,32 +1,6 @@
 #include "bench/Intake.h"
 
-#include "service/TarnReportingPlatform.h"
-#include "service/TarnReportingWorkerClasses.h"
-
 namespace tarn::bench {
-
-IntakePlatform::IntakePlatform()
-    : facilities_{.clock = clock_,
-                  .workQueues = fakes_.workQueues,
-                  .conditions = fakes_.conditions,
-                  .log = fakes_.log,
-                  .tracePoints = tracePoints_,
-                  .deviceProperties = fakes_.deviceProperties,
-                  .defaults = fakes_.defaults,
-                  .notifications = fakes_.notifications,
-                  .processFacts = fakes_.processFacts,
-                  .processControl = fakes_.processControl,
-                  .tally = tally_,
-                  .fileSystem = fakes_.fileSystem,
-                  .localCalendar = fakes_.localCalendar,
-                  .randomSource = fakes_.randomSource,
-                  .processEnvironment = fakes_.processEnvironment,
-                  .commandRunner = fakes_.commandRunner,
-                  .signposts = &signposts_} {
-  fakes_.log.setThreshold(platform::LogLevel::Error);
-  TarnReportingInstallFacilities(&facilities_);
-  TarnReportingSession::setAllWorkerClasses(TarnReportingWorkerClasses());
-}
 
 std::shared_ptr<TarnReportingSession> makeSession() {
   const plist::Dictionary configuration{{"HostApplicationDisplayID", "sys.oxbow.music"}};

@@ -1,4 +1,4 @@
-// Sessions in this process, with the real workers and an analytics service that wants nothing, and messages for them.
+// A session in this process, and messages for it. It needs a SessionPlatform.
 #pragma once
 
 #include <cstdint>
@@ -7,40 +7,9 @@
 
 #include "bench/Measure.h"
 #include "bench/Message.h"
-#include "platform/Facilities.h"
-#include "platform/TallyService.h"
-#include "platform/TracePoints.h"
-#include "platform/linux/LinuxClock.h"
-#include "platform/linux/LinuxSignposts.h"
-#include "platform/testing/FakePlatform.h"
 #include "session/TarnReportingSession.h"
 
 namespace tarn::bench {
-
-// The platform of the tests, but for the facilities that a message meets: the fakes note down everything.
-class IntakePlatform {
- public:
-  IntakePlatform();
-  linux_host::LinuxSignposts& signposts() { return signposts_; }
-
- private:
-  class NoTally final : public platform::TallyService {
-   public:
-    bool eventIsInUse(std::string_view) override { return false; }
-    void sendEventLazy(std::string_view, PayloadCallback) override {}
-  };
-  class NoTracePoints final : public platform::TracePoints {
-   public:
-    void emit(std::uint32_t, std::int64_t) noexcept override {}
-  };
-
-  testing::FakePlatform fakes_;
-  linux_host::LinuxClock clock_;
-  NoTally tally_;
-  NoTracePoints tracePoints_;
-  linux_host::LinuxSignposts signposts_{clock_};
-  const platform::Facilities facilities_;
-};
 
 // A running session of the type "generic".
 std::shared_ptr<TarnReportingSession> makeSession();

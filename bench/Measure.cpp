@@ -45,6 +45,10 @@ std::string microseconds(double seconds) {
   return withUnit(seconds * 1e6, " us");
 }
 
+std::string milliseconds(double seconds) {
+  return withUnit(seconds * 1e3, " ms");
+}
+
 std::string nanoseconds(double nanoseconds) {
   return withUnit(nanoseconds, " ns");
 }
@@ -55,6 +59,10 @@ std::string perSecond(double rate) {
 
 std::string bytes(double count) {
   return withUnit(count, " B");
+}
+
+std::string megabytes(double count) {
+  return withUnit(count / 1e6, " MB");
 }
 
 std::string times(double ratio) {

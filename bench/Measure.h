@@ -38,11 +38,13 @@ inline void keep(const Value& value) {
   asm volatile("" : : "r,m"(value) : "memory");
 }
 
-// "7.52 us", "412 ns", "634 k/s", "187 B"
+// "7.52 us", "412 ns", "634 k/s", "187 B", "12.4 MB", "797 ms"
 std::string microseconds(double seconds);
+std::string milliseconds(double seconds);
 std::string nanoseconds(double nanoseconds);
 std::string perSecond(double rate);
 std::string bytes(double count);
+std::string megabytes(double count);
 std::string times(double ratio);
 
 }  // namespace tarn::bench

@@ -43,6 +43,16 @@ double residentBytes(pid_t process) {
   return resident * static_cast<double>(::sysconf(_SC_PAGESIZE));
 }
 
+double peakResidentBytes() {
+  std::ifstream file("/proc/self/status");
+  for (std::string line; std::getline(file, line);) {
+    if (line.starts_with("VmHWM:")) {
+      return std::stod(line.substr(sizeof "VmHWM:")) * 1024;
+    }
+  }
+  fail("can't read the memory of this process");
+}
+
 OneProcessor::OneProcessor() {
   if (::sched_getaffinity(0, sizeof before_, &before_) != 0) {
     fail("can't find out the processors");

@@ -19,6 +19,8 @@ namespace tarn::bench {
 double processorSeconds(pid_t process);
 // Resident memory of a process (0: this one), in bytes.
 double residentBytes(pid_t process);
+// The most that this process has had resident so far (of a child: since its start), in bytes.
+double peakResidentBytes();
 
 // While it lives this process and the children that it starts run on one processor only.
 class OneProcessor {

@@ -6,6 +6,7 @@
 #include "bench/Intake.h"
 #include "bench/Measure.h"
 #include "bench/Processes.h"
+#include "bench/SessionPlatform.h"
 #include "platform/linux/SignpostBuffer.h"
 #include "service/TarnReportingSignpost.h"
 
@@ -55,7 +56,7 @@ double callsRecorded(std::size_t count, linux_host::LinuxSignposts& signposts) {
 enum Sample { kIntake, kIntakeWithMore, kEmpty, kOff, kOn, kSamples };
 
 std::vector<double> measureAll(const Settings& settings) {
-  IntakePlatform platform;
+  SessionPlatform platform(Tally::WantsNothing);
   const auto session = makeSession();
   Feeder feeder(*session);
   feeder.fillTo(10 * Feeder::kWindow);

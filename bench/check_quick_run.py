@@ -36,8 +36,12 @@ ROWS = [
     ("trace points off, one alone", ("an empty loop",)),
     ("trace points on, one alone", ("off",)),
 ]
-FIGURE = re.compile(r"^\d+(\.\d+)? (us|ns|B|k/s)$")
-PEER = re.compile(r"^(?P<name>.+?) \d+(\.\d+)? (us|ns|B|k/s)( \(.*\))?$")
+for kind in ("ordinary", "merging pairs", "ending segments", "ordinary, summary file"):
+    ROWS.append((f"stop of 10^3 messages, {kind}, a message", ("in all",)))
+    ROWS.append((f"stop of 10^4 messages, {kind}, a message", ("in all",)))
+    ROWS.append((f"stop of 10^4 messages, {kind}, extra memory", ("the log",)))
+FIGURE = re.compile(r"^\d+(\.\d+)? (ms|us|ns|MB|B|k/s)$")
+PEER = re.compile(r"^(?P<name>.+?) \d+(\.\d+)? (ms|us|ns|MB|B|k/s)( \(.*\))?$")
 
 
 def rows_of(output):

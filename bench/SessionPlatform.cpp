@@ -1,0 +1,39 @@
+#include "bench/SessionPlatform.h"
+
+#include "bench/Measure.h"
+#include "service/TarnReportingPlatform.h"
+#include "service/TarnReportingWorkerClasses.h"
+#include "session/TarnReportingSession.h"
+
+namespace tarn::bench {
+
+SessionPlatform::SessionPlatform(Tally tally, const std::string& directory)
+    : fileSystem_({.diagnosticLogs = directory + "/DiagnosticLogs", .temporary = directory}),
+      tally_(tally),
+      facilities_{.clock = clock_,
+                  .workQueues = fakes_.workQueues,
+                  .conditions = fakes_.conditions,
+                  .log = fakes_.log,
+                  .tracePoints = tracePoints_,
+                  .deviceProperties = fakes_.deviceProperties,
+                  .defaults = fakes_.defaults,
+                  .notifications = fakes_.notifications,
+                  .processFacts = fakes_.processFacts,
+                  .processControl = fakes_.processControl,
+                  .tally = tally_,
+                  .fileSystem = fileSystem_,
+                  .localCalendar = fakes_.localCalendar,
+                  .randomSource = fakes_.randomSource,
+                  .processEnvironment = fakes_.processEnvironment,
+                  .commandRunner = fakes_.commandRunner,
+                  .signposts = &signposts_} {
+  fakes_.log.setThreshold(platform::LogLevel::Error);
+  TarnReportingInstallFacilities(&facilities_);
+  TarnReportingSession::setAllWorkerClasses(TarnReportingWorkerClasses());
+}
+
+void SessionPlatform::DroppingTally::sendEventLazy(std::string_view, PayloadCallback payload) {
+  keep(payload().size());
+}
+
+}  // namespace tarn::bench
