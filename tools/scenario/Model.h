@@ -50,7 +50,7 @@ struct Expectation {
   std::size_t redundant = 0;
   std::size_t sessions = 0;
   std::set<std::int64_t> reporterIDs;  // of the sessions that it creates
-  std::size_t derived = 0;  // messages
+  std::size_t derived = 0;             // messages
   // By application name; within one, in this order.
   std::map<std::string, std::vector<ExpectedEvent>> events;
   // The least seconds that each connection is open.
