@@ -1,0 +1,66 @@
+// Random records and random inputs beside the slow and obvious model of the wire format.
+#include <gtest/gtest.h>
+
+#include <cstdio>
+#include <random>
+
+#include "diagnostics/AudioIssueDetected.h"
+#include "diagnostics/WireReader.h"
+#include "diagnostics/WireWriter.h"
+#include "tests/diagnostics/AudioIssueModels.h"
+
+namespace pylonmetrics::testing {
+namespace {
+
+unsigned freshSeed() {
+  const unsigned seed = std::random_device{}();
+  std::printf("seed %u\n", seed);
+  return seed;
+}
+
+std::string written(const AudioIssueDetected& record) {
+  WireWriter writer;
+  record.writeTo(writer);
+  return writer.bytes();
+}
+
+TEST(AudioIssueModel, RandomRecordsAreWrittenAsTheModelWritesThemAndReadBack) {
+  RandomIssues random(freshSeed());
+  for (int round = 0; round < 5000; ++round) {
+    const ModelIssue issue = random.issue();
+    const AudioIssueDetected record = recordOf(issue);
+    const std::string bytes = written(record);
+    ASSERT_EQ(bytes, encode(issue));
+    AudioIssueDetected again;
+    WireReader reader(bytes);
+    ASSERT_TRUE(again.readFrom(reader));
+    ASSERT_TRUE(reader.atEnd());
+    ASSERT_TRUE(again == record);
+    ASSERT_EQ(again.hash_value(), record.hash_value());
+    ModelIssue modelled;
+    ASSERT_TRUE(decode(bytes, modelled));
+    ASSERT_EQ(modelled, issue);
+  }
+}
+
+TEST(AudioIssueModel, RandomInputsAreReadAsTheModelReadsThem) {
+  RandomIssues random(freshSeed());
+  int good = 0;
+  int bad = 0;
+  for (int round = 0; round < 50000; ++round) {
+    const std::string bytes = random.input();
+    ModelIssue expected;
+    const bool isGood = decode(bytes, expected);
+    AudioIssueDetected record;
+    WireReader reader(bytes);
+    ASSERT_EQ(record.readFrom(reader), isGood) << "round " << round;
+    ASSERT_EQ(modelOf(record), expected) << "round " << round;
+    ++(isGood ? good : bad);
+  }
+  // Both kinds must have been seen in numbers, or this says little.
+  EXPECT_GT(good, 5000);
+  EXPECT_GT(bad, 5000);
+}
+
+}  // namespace
+}  // namespace pylonmetrics::testing
