@@ -32,20 +32,6 @@ class TarnReportingDecliningProducer : public TarnReportingDecliningWorker<Self>
   using TarnReportingDecliningWorker<Self>::TarnReportingDecliningWorker;
 };
 
-class TarnReportingSessionWattlogWorker : public TarnReportingDecliningConsumer<TarnReportingSessionWattlogWorker> {
- public:
-  static constexpr std::string_view kClassName = "TarnReportingSessionWattlogWorker";
-  static bool startOnInit() { return true; }
-  static bool handleSingleMessageSession() { return true; }
-};
-
-class TarnReportingSessionPylonWorker : public TarnReportingDecliningConsumer<TarnReportingSessionPylonWorker> {
- public:
-  static constexpr std::string_view kClassName = "TarnReportingSessionPylonWorker";
-  static bool startOnInit() { return true; }
-  static bool handleSingleMessageSession() { return true; }
-};
-
 class TarnReportingSessionDriverSnapshotWorker
     : public TarnReportingDecliningProducer<TarnReportingSessionDriverSnapshotWorker> {
  public:

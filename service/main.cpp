@@ -46,9 +46,11 @@
 #include "platform/linux/Watchdog.h"
 #include "platform/recorder/Recorder.h"
 #include "platform/recorder/RecorderGyreService.h"
+#include "platform/recorder/RecorderPylonService.h"
 #include "platform/recorder/RecorderSnareService.h"
 #include "platform/recorder/RecorderTallyService.h"
 #include "platform/recorder/RecorderTattleService.h"
+#include "platform/recorder/RecorderWattlogService.h"
 #include "service/TarnReportingPlatform.h"
 #include "service/TarnReportingService.h"
 #include "service/TarnReportingWorkerClasses.h"
@@ -109,6 +111,8 @@ class Host final : public platform::ProcessControl {
         connections_(loop_, log, limitsOf(setup.configuration)),
         recorder_(recorderOptionsOf(setup), log, clock),
         tally_(recorder_, clock, setup.configuration.tally.inUse),
+        wattlog_(recorder_, clock),
+        pylon_(recorder_, clock),
         snare_(recorder_, clock, randomSource_, setup.configuration.snare.refuse),
         workQueues_(clock, loop_.queue()),
         tattle_(recorder_, clock, workQueues_),
@@ -197,6 +201,8 @@ class Host final : public platform::ProcessControl {
   ConnectionHost connections_;
   recorder::Recorder recorder_;
   recorder::RecorderTallyService tally_;
+  recorder::RecorderWattlogService wattlog_;
+  recorder::RecorderPylonService pylon_;
   LinuxRandomSource randomSource_;
   recorder::RecorderSnareService snare_;
   LinuxWorkQueues workQueues_;
@@ -237,6 +243,8 @@ class Host final : public platform::ProcessControl {
                                          .randomSource = randomSource_,
                                          .processEnvironment = processEnvironment_,
                                          .commandRunner = commandRunner_,
+                                         .wattlog = &wattlog_,
+                                         .pylon = &pylon_,
                                          .snare = &snare_,
                                          .tattle = &tattle_,
                                          .gyre = &gyre_,

@@ -1,0 +1,31 @@
+// TarnReportingSessionPylonWorker: posts one metric record for every message about a detected audio issue, as it
+// arrives, to the wireless-diagnostics metric service.
+//
+// It runs from the session's creation on and in single-message sessions; not where the device has no metric service.
+// Nothing is kept between messages.
+#pragma once
+
+#include <memory>
+#include <string_view>
+
+#include "session/TarnReportingSessionWorker.h"
+
+namespace tarn {
+
+class TarnReportingSessionPylonWorker : public TarnReportingSessionWorkerProtocol,
+                                        public TarnReportingSessionWorkerConsumerProtocol {
+ public:
+  static constexpr std::string_view kClassName = "TarnReportingSessionPylonWorker";
+
+  static std::unique_ptr<TarnReportingSessionPylonWorker> initWithSession(
+      const std::shared_ptr<TarnReportingSession>& session);
+  static bool startOnInit() { return true; }
+  static bool handleSingleMessageSession() { return true; }
+  using TarnReportingSessionWorkerProtocol::TarnReportingSessionWorkerProtocol;
+
+  // A message of another type than IssueDetector is left alone. What an issue message doesn't say is logged and stays
+  // at its default in the record.
+  void handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) override;
+};
+
+}  // namespace tarn
