@@ -41,7 +41,8 @@ plist::Dictionary signature(std::string_view type, std::string_view subType, std
 class SnareHapticLeaks : public SnareFixture {};
 
 TEST_F(SnareHapticLeaks, StateHasItsThresholds) {
-  const WorkerInstanceState& state = stateOf(startedSession(AudioServiceType::Haptics), kHapticLeaks);
+  const Session session = startedSession(AudioServiceType::Haptics);
+  const WorkerInstanceState& state = stateOf(session, kHapticLeaks);
   EXPECT_EQ(state.interestThresholdCount, 2U);
   EXPECT_EQ(state.interestThresholdDurationSeconds, 60.0);
   EXPECT_FALSE(state.oncePerSession);
@@ -166,7 +167,8 @@ TEST_F(SnareHapticLeaks, NeverFireInSessionsOfTypeTestButCountForTheOthers) {
 class SnareStuckSounds : public SnareFixture {};
 
 TEST_F(SnareStuckSounds, StateHasItsThreshold) {
-  const WorkerInstanceState& state = stateOf(startedSession(AudioServiceType::SystemSounds), kSSSLeaks);
+  const Session session = startedSession(AudioServiceType::SystemSounds);
+  const WorkerInstanceState& state = stateOf(session, kSSSLeaks);
   EXPECT_EQ(state.interestThresholdCount, 1U);
   EXPECT_EQ(state.interestThresholdDurationSeconds, 1.7976931348623157e308);
   EXPECT_FALSE(state.oncePerSession);
@@ -419,8 +421,9 @@ TEST_F(SnareRecordQueues, AreNeverOfInterest) {
 }
 
 TEST_F(SnareRecordQueues, EachSessionHasAStateOfItsOwn) {
-  EXPECT_NE(&stateOf(startedSession(AudioServiceType::Generic, 7), kMurmur),
-            &stateOf(startedSession(AudioServiceType::Generic, 8), kMurmur));
+  const Session first = startedSession(AudioServiceType::Generic, 7);
+  const Session second = startedSession(AudioServiceType::Generic, 8);
+  EXPECT_NE(&stateOf(first, kMurmur), &stateOf(second, kMurmur));
 }
 
 }  // namespace

@@ -48,8 +48,9 @@ TEST_F(SnareWorker, SingleMessageSessionsHaveTheInstancesOfLeaksAlone) {
 
 TEST_F(SnareWorker, AlarmAndRecordQueueInstancesDeclineSingleMessageSessionsThemselves) {
   const Session single = makeSession(1, TarnReportingSession::Mode::SingleMessage);
+  const Session ordinary = startedSession(AudioServiceType::Generic);
   std::size_t declining = 0;
-  for (const Worker::Member& member : workerOf(startedSession(AudioServiceType::Generic))->instances()) {
+  for (const Worker::Member& member : workerOf(ordinary)->instances()) {
     declining += member.instanceClass.initWithSession(single) == nullptr ? 1U : 0U;
   }
   EXPECT_EQ(declining, 2U);
