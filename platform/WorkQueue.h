@@ -28,6 +28,19 @@ class WorkQueue {
   virtual std::size_t waiting() const noexcept = 0;
 };
 
+// A serial queue whose work can wait for something without holding a thread.
+//
+//   start task:  ask the back-end -> suspend(9 s, next)         back-end's thread:  resume()
+//   the queue:   [nothing runs .........................]  next  what was handed over meanwhile, in its order
+class SuspendableQueue : public WorkQueue {
+ public:
+  // For work of this queue, once and as the last thing it does: nothing more of the queue begins until resume() is
+  // called or `longest` has passed. Then `next` runs, ahead of all that waits.
+  virtual void suspend(std::chrono::nanoseconds longest, Work next) = 0;
+  // Ends the suspension. Nothing happens without one.
+  virtual void resume() = 0;
+};
+
 enum class QualityOfService {
   UserInteractive,  // the server queue: on Linux it is served by the thread that also waits for the sockets
   UserInitiated,
@@ -41,6 +54,8 @@ class WorkQueues {
   // A new serial queue. Queues other than the user-interactive one share a small pool of threads, each keeping its own
   // order. Work that is still waiting when its last owner lets go of a queue is run all the same.
   virtual std::shared_ptr<WorkQueue> makeSerialQueue(std::string_view name, QualityOfService quality) = 0;
+  // The same, for whoever waits on a queue of its own: a thousand waits cost no thread.
+  virtual std::shared_ptr<SuspendableQueue> makeSuspendableQueue(std::string_view name, QualityOfService quality) = 0;
 };
 
 }  // namespace tarn::platform

@@ -4,6 +4,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <deque>
+#include <iterator>
 #include <map>
 #include <mutex>
 #include <optional>
@@ -39,6 +40,17 @@ class ManualSchedule {
     delayed_.emplace(due, Piece{queue, std::move(work)});  // a multimap keeps equal moments in the order of the calls
     promoteDue();
   }
+  void suspend(std::size_t queue, std::chrono::nanoseconds longest, platform::Work next) {
+    const std::lock_guard lock(mutex_);
+    suspended_[queue] = {clock_.monotonic() + std::max(longest, std::chrono::nanoseconds(0)), std::move(next)};
+  }
+  void resume(std::size_t queue) {
+    const std::lock_guard lock(mutex_);
+    promoteDue();
+    if (const auto found = suspended_.find(queue); found != suspended_.end()) {
+      endSuspension(found);
+    }
+  }
   bool isCurrent(std::size_t queue) const {
     const std::lock_guard lock(mutex_);
     return !running_.empty() && running_.back() == queue && runner_ == std::this_thread::get_id();
@@ -52,8 +64,11 @@ class ManualSchedule {
   std::size_t delayed(Filter filter) {
     const std::lock_guard lock(mutex_);
     promoteDue();
-    return static_cast<std::size_t>(std::count_if(delayed_.begin(), delayed_.end(),
-                                                  [&](const auto& entry) { return matches(entry.second, filter); }));
+    const auto suspended = std::count_if(suspended_.begin(), suspended_.end(),
+                                         [&](const auto& entry) { return !filter || entry.first == *filter; });
+    return static_cast<std::size_t>(suspended + std::count_if(delayed_.begin(), delayed_.end(), [&](const auto& entry) {
+                                      return matches(entry.second, filter);
+                                    }));
   }
 
   bool runOne(Filter filter) {
@@ -62,7 +77,8 @@ class ManualSchedule {
       const std::lock_guard lock(mutex_);
       promoteDue();
       const auto next = std::find_if(ready_.begin(), ready_.end(), [&](const Piece& piece) {
-        return matches(piece, filter) && std::find(running_.begin(), running_.end(), piece.queue) == running_.end();
+        return matches(piece, filter) && !suspended_.contains(piece.queue) &&
+               std::find(running_.begin(), running_.end(), piece.queue) == running_.end();
       });
       if (next == ready_.end()) {
         return false;
@@ -106,12 +122,14 @@ class ManualSchedule {
     for (;;) {
       std::deque<Piece> ready;
       std::multimap<std::chrono::nanoseconds, Piece> delayed;
+      Suspensions suspended;
       {
         const std::lock_guard lock(mutex_);
         ready.swap(ready_);
         delayed.swap(delayed_);
+        suspended.swap(suspended_);
       }
-      if (ready.empty() && delayed.empty()) {
+      if (ready.empty() && delayed.empty() && suspended.empty()) {
         return;
       }
     }
@@ -123,9 +141,22 @@ class ManualSchedule {
     platform::Work work;
   };
 
+  struct Suspension {
+    std::chrono::nanoseconds due{};
+    platform::Work next;
+  };
+  using Suspensions = std::map<std::size_t, Suspension>;
+
   static bool matches(const Piece& piece, Filter filter) { return !filter || piece.queue == *filter; }
+  Suspensions::iterator endSuspension(Suspensions::iterator at) {
+    ready_.push_front({at->first, std::move(at->second.next)});
+    return suspended_.erase(at);
+  }
   void promoteDue() {
     const auto now = clock_.monotonic();
+    for (auto at = suspended_.begin(); at != suspended_.end();) {
+      at = at->second.due <= now ? endSuspension(at) : std::next(at);
+    }
     while (!delayed_.empty() && delayed_.begin()->first <= now) {
       ready_.push_back(std::move(delayed_.begin()->second));
       delayed_.erase(delayed_.begin());
@@ -133,7 +164,11 @@ class ManualSchedule {
   }
   std::optional<std::chrono::nanoseconds> nextMoment() const {
     const std::lock_guard lock(mutex_);
-    return delayed_.empty() ? std::nullopt : std::optional(delayed_.begin()->first);
+    auto moment = delayed_.empty() ? std::nullopt : std::optional(delayed_.begin()->first);
+    for (const auto& [queue, suspension] : suspended_) {
+      moment = std::min(moment.value_or(suspension.due), suspension.due);
+    }
+    return moment;
   }
 
   ManualClock& clock_;
@@ -141,6 +176,7 @@ class ManualSchedule {
   std::size_t queues_ = 0;
   std::deque<Piece> ready_;
   std::multimap<std::chrono::nanoseconds, Piece> delayed_;
+  Suspensions suspended_;             // by queue
   std::vector<std::size_t> running_;  // the queues whose work runs, the innermost last
   std::thread::id runner_;
 };
@@ -167,6 +203,14 @@ std::size_t ManualWorkQueue::waiting() const noexcept {
   return schedule_->waiting(identifier_);
 }
 
+void ManualWorkQueue::suspend(std::chrono::nanoseconds longest, platform::Work next) {
+  schedule_->suspend(identifier_, longest, std::move(next));
+}
+
+void ManualWorkQueue::resume() {
+  schedule_->resume(identifier_);
+}
+
 bool ManualWorkQueue::runOne() {
   return schedule_->runOne(identifier_);
 }
@@ -187,6 +231,15 @@ ManualWorkQueues::~ManualWorkQueues() {
 
 std::shared_ptr<platform::WorkQueue> ManualWorkQueues::makeSerialQueue(std::string_view name,
                                                                        platform::QualityOfService quality) {
+  return make(name, quality);
+}
+
+std::shared_ptr<platform::SuspendableQueue> ManualWorkQueues::makeSuspendableQueue(std::string_view name,
+                                                                                   platform::QualityOfService quality) {
+  return make(name, quality);
+}
+
+std::shared_ptr<ManualWorkQueue> ManualWorkQueues::make(std::string_view name, platform::QualityOfService quality) {
   auto queue = std::make_shared<ManualWorkQueue>(schedule_, schedule_->newQueue(), std::string(name), quality);
   made_.push_back({std::string(name), queue});
   return queue;

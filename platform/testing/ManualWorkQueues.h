@@ -25,7 +25,7 @@ namespace detail {
 class ManualSchedule;
 }
 
-class ManualWorkQueue final : public platform::WorkQueue {
+class ManualWorkQueue final : public platform::SuspendableQueue {
  public:
   ManualWorkQueue(std::shared_ptr<detail::ManualSchedule> schedule, std::size_t identifier, std::string name,
                   platform::QualityOfService quality);
@@ -35,6 +35,8 @@ class ManualWorkQueue final : public platform::WorkQueue {
   void asyncAfter(std::chrono::nanoseconds delay, platform::Work work) override;
   bool isCurrent() const noexcept override;
   std::size_t waiting() const noexcept override;
+  void suspend(std::chrono::nanoseconds longest, platform::Work next) override;
+  void resume() override;
 
   // Controls.
   // Runs the oldest piece of due work of this queue; whether there was one.
@@ -45,7 +47,7 @@ class ManualWorkQueue final : public platform::WorkQueue {
   // Observations.
   const std::string& name() const noexcept { return name_; }
   platform::QualityOfService quality() const noexcept { return quality_; }
-  // Pieces of work of this queue whose moment has not come.
+  // Pieces of work of this queue whose moment has not come; a suspension is one.
   std::size_t delayed() const;
 
  private:
@@ -69,6 +71,8 @@ class ManualWorkQueues final : public platform::WorkQueues {
   // The interface.
   std::shared_ptr<platform::WorkQueue> makeSerialQueue(std::string_view name,
                                                        platform::QualityOfService quality) override;
+  std::shared_ptr<platform::SuspendableQueue> makeSuspendableQueue(std::string_view name,
+                                                                   platform::QualityOfService quality) override;
 
   // Controls.
   // Runs the oldest piece of due work of all queues; whether there was one.
@@ -95,6 +99,8 @@ class ManualWorkQueues final : public platform::WorkQueues {
     std::string name;
     std::weak_ptr<ManualWorkQueue> queue;
   };
+
+  std::shared_ptr<ManualWorkQueue> make(std::string_view name, platform::QualityOfService quality);
 
   const std::shared_ptr<detail::ManualSchedule> schedule_;
   std::vector<Made> made_;

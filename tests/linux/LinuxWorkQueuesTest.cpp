@@ -21,6 +21,9 @@ using testing::eventually;
 class LinuxWorkQueuesTest : public ::testing::Test {
  protected:
   std::shared_ptr<platform::WorkQueue> make() { return queues_.makeSerialQueue("q", QualityOfService::Utility); }
+  std::shared_ptr<platform::SuspendableQueue> makeSuspendable() {
+    return queues_.makeSuspendableQueue("q", QualityOfService::Utility);
+  }
   static void finish(platform::WorkQueue& queue) {
     std::promise<void> done;
     queue.async([&done] { done.set_value(); });
@@ -114,6 +117,130 @@ TEST_F(LinuxWorkQueuesTest, DelayedWorkComesByItsMomentAndNeverEarly) {
   queue->asyncAfter(20ms, [&] { ran += 'b'; });
   EXPECT_GE(last.get_future().get() - begin, 30ms);
   EXPECT_EQ(ran, "abc");
+}
+
+TEST_F(LinuxWorkQueuesTest, ASuspendedQueueGoesOnWithWhatIsNextAheadOfWhatWaits) {
+  const auto queue = makeSuspendable();
+  std::string ran;
+  std::promise<void> suspended;
+  queue->async([&] {
+    queue->async([&ran] { ran += 'a'; });
+    queue->suspend(1h, [&] { ran += queue->isCurrent() ? 'n' : '!'; });
+    queue->async([&ran] { ran += 'b'; });
+    suspended.set_value();
+  });
+  suspended.get_future().get();
+  finish(*make());
+  EXPECT_EQ(queue->waiting(), 2u);
+  EXPECT_EQ(ran, "");
+  queue->resume();
+  finish(*queue);
+  EXPECT_EQ(ran, "nab");
+}
+
+TEST_F(LinuxWorkQueuesTest, ASuspensionEndsByItselfAndNeverEarly) {
+  const auto queue = makeSuspendable();
+  std::promise<std::chrono::nanoseconds> ended;
+  const auto begin = running_.clock.monotonic();
+  queue->async([&] { queue->suspend(30ms, [&] { ended.set_value(running_.clock.monotonic()); }); });
+  EXPECT_GE(ended.get_future().get() - begin, 30ms);
+  queue->resume();  // nothing is suspended any more
+  finish(*queue);
+}
+
+TEST_F(LinuxWorkQueuesTest, AQueueMayBeResumedByTheWorkThatSuspendedIt) {
+  const auto queue = makeSuspendable();
+  std::string ran;
+  queue->async([&] {
+    queue->suspend(1h, [&] {
+      ran += 'n';
+      queue->suspend(1h, [&ran] { ran += 'm'; });
+      queue->resume();
+    });
+    queue->resume();
+    queue->resume();
+    ran += 'w';
+  });
+  queue->async([&ran] { ran += 'a'; });
+  finish(*queue);
+  EXPECT_EQ(ran, "wnma");
+}
+
+TEST_F(LinuxWorkQueuesTest, ManySuspendedQueuesHoldUpNoOther) {
+  std::vector<std::shared_ptr<platform::SuspendableQueue>> waiting;
+  std::atomic<int> ended{0};
+  for (int i = 0; i < 100; ++i) {
+    waiting.push_back(makeSuspendable());
+    const auto queue = waiting.back();
+    queue->async([queue, &ended] { queue->suspend(1h, [&ended] { ++ended; }); });
+  }
+  finish(*make());
+  EXPECT_TRUE(eventually([&] { return queues_.unfinished() == 100; }));
+  EXPECT_EQ(ended, 0);
+  EXPECT_FALSE(queues_.settle(1ms));
+  for (const auto& queue : waiting) {
+    queue->resume();
+  }
+  EXPECT_TRUE(queues_.settle(20s));
+  EXPECT_EQ(ended, 100);
+}
+
+TEST_F(LinuxWorkQueuesTest, ASuspendedQueueThatNobodyHoldsAnyMoreIsRun) {
+  std::atomic<int> ran{0};
+  auto queue = makeSuspendable();
+  queue->async([raw = queue.get(), &ran] { raw->suspend(20ms, [&ran] { ++ran; }); });
+  queue->async([&ran] { ++ran; });
+  ASSERT_TRUE(eventually([&] { return queue->waiting() == 1; }));
+  queue.reset();
+  EXPECT_TRUE(eventually([&] { return ran == 2; }));
+}
+
+TEST_F(LinuxWorkQueuesTest, IsFullFromTheHighMarkToTheLowOneAndTellsSo) {
+  std::atomic<int> told{0};
+  LinuxWorkQueues queues(running_.clock, running_.loop.queue(), {.high = 10, .low = 4});
+  queues.setRoomHandler([&] { told += queues.isFull() ? 100 : 1; });
+  const auto queue = queues.makeSuspendableQueue("q", QualityOfService::Utility);
+  std::promise<void> suspended;
+  queue->async([&] {
+    queue->suspend(1h, [] {});
+    suspended.set_value();
+  });
+  suspended.get_future().get();
+  EXPECT_TRUE(eventually([&] { return queues.unfinished() == 1; }));
+  for (int i = 0; i < 8; ++i) {
+    queue->async([] {});
+  }
+  EXPECT_FALSE(queues.isFull());
+  queue->async([] {});
+  EXPECT_TRUE(queues.isFull());
+  queue->resume();
+  EXPECT_TRUE(queues.settle(20s));
+  EXPECT_TRUE(eventually([&] { return told == 1; }));
+  EXPECT_FALSE(queues.isFull());
+}
+
+TEST_F(LinuxWorkQueuesTest, TheEndDestroysWhatIsSuspendedDelayedOrCame) {
+  const auto held = std::make_shared<int>(0);
+  const std::weak_ptr<int> watched = held;
+  std::shared_ptr<platform::SuspendableQueue> queue;
+  {
+    LinuxWorkQueues queues(running_.clock, running_.loop.queue());
+    queue = queues.makeSuspendableQueue("q", QualityOfService::Utility);
+    std::promise<void> suspended;
+    queue->async([&suspended, queue, held] {
+      queue->suspend(1h, [queue, held] { ADD_FAILURE(); });
+      queue->asyncAfter(1h, [queue, held] { ADD_FAILURE(); });
+      suspended.set_value();
+    });
+    queue->async([queue, held] { ADD_FAILURE(); });
+    suspended.get_future().get();
+    queue->async([queue, held] { ADD_FAILURE(); });
+  }
+  queue->async([queue, held] { ADD_FAILURE(); });
+  queue->asyncAfter(1h, [queue, held] { ADD_FAILURE(); });
+  queue->resume();
+  EXPECT_EQ(watched.use_count(), 1);
+  EXPECT_EQ(queue.use_count(), 1);
 }
 
 TEST_F(LinuxWorkQueuesTest, TheEndRunsWhatIsReady) {

@@ -99,6 +99,63 @@ TEST(QueueStress, APooledQueueRunsDelayedWorkNeverEarlyAndAllOfIt) {
   expectDelaysUnderStress(*queue, running.clock);
 }
 
+// Queues that suspend themselves over and over, resumed by others or by their time, while all hand over to each other:
+// nothing is lost, nothing overlaps, nothing runs while its queue is suspended.
+TEST(QueueStress, SuspensionsLoseNothingAndLetNothingThrough) {
+  testing::RunningLoop running;
+  LinuxWorkQueues queues(running.clock, running.loop.queue());
+  struct Counted {
+    std::shared_ptr<platform::SuspendableQueue> queue;
+    int rounds = 0;
+    bool suspended = false;
+  };
+  constexpr int kRounds = 2000;
+  std::vector<Counted> all(16);
+  std::atomic<int> wrong{0};
+  std::atomic<int> ran{0};
+  for (Counted& each : all) {
+    each.queue = queues.makeSuspendableQueue("stress", platform::QualityOfService::Utility);
+    for (int round = 0; round < kRounds; ++round) {
+      each.queue->async([&, round] {
+        wrong += each.suspended || each.rounds++ != round ? 1 : 0;
+        each.suspended = true;
+        each.queue->suspend(std::chrono::microseconds(round % 3 == 0 ? 100 : 10'000'000), [&] {
+          each.suspended = false;
+          ++ran;
+        });
+      });
+    }
+  }
+  std::atomic<bool> over{false};
+  std::thread resumer([&] {
+    while (!over) {
+      for (Counted& each : all) {
+        each.queue->resume();
+      }
+    }
+  });
+  EXPECT_TRUE(eventually([&] { return ran == kRounds * static_cast<int>(all.size()); }, 60s));
+  over = true;
+  resumer.join();
+  EXPECT_EQ(wrong, 0);
+  EXPECT_TRUE(queues.settle(20s));
+}
+
+// Pieces that come one by one, each when the pool has just fallen asleep, is about to, or looks again.
+TEST(QueueStress, ASleepingPoolMissesNoWakeUp) {
+  testing::RunningLoop running;
+  LinuxWorkQueues queues(running.clock, running.loop.queue());
+  const auto queue = queues.makeSerialQueue("stress", platform::QualityOfService::Utility);
+  const auto delayed = queues.makeSerialQueue("delayed", platform::QualityOfService::Utility);
+  std::mt19937 random(7);
+  for (int round = 0; round < 1000; ++round) {
+    std::atomic<int> ran{0};
+    queue->async([&ran] { ++ran; });
+    delayed->asyncAfter(std::chrono::nanoseconds(random() % 1'000'000), [&ran] { ++ran; });
+    ASSERT_TRUE(eventually([&] { return ran == 2; })) << round;
+  }
+}
+
 TEST(QueueStress, ASleepingServerMissesNoWakeUp) {
   testing::RunningLoop running;
   running.start();

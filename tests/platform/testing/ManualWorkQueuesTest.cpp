@@ -21,6 +21,9 @@ class ManualWorkQueuesTest : public ::testing::Test {
   std::shared_ptr<platform::WorkQueue> queue(const char* name = "queue") {
     return queues_.makeSerialQueue(name, QualityOfService::Utility);
   }
+  std::shared_ptr<platform::SuspendableQueue> suspendable(const char* name = "queue") {
+    return queues_.makeSuspendableQueue(name, QualityOfService::Utility);
+  }
   platform::Work note(std::string text) {
     return [this, text = std::move(text)] { ran_.push_back(text); };
   }
@@ -195,6 +198,50 @@ TEST_F(ManualWorkQueuesTest, DropAllDestroysWorkUncalledIncludingWhatThatHandsOv
   queues_.dropAll();
   EXPECT_EQ(queues_.advance(2s), 0U);
   EXPECT_TRUE(ran_.empty());
+}
+
+TEST_F(ManualWorkQueuesTest, SuspendedQueueRunsNothingUntilItIsResumed) {
+  const auto work = suspendable();
+  const auto other = queue("other");
+  work->async([&] { work->suspend(1h, note("next")); });
+  work->async(note("behind"));
+  other->async(note("other"));
+  queues_.runUntilIdle();
+  EXPECT_EQ(ran_, std::vector<std::string>{"other"});
+  EXPECT_EQ(work->waiting(), 1U);
+  EXPECT_EQ(queues_.find("queue")->delayed(), 1U);
+  work->resume();
+  work->resume();
+  queues_.runUntilIdle();
+  EXPECT_EQ(ran_, (std::vector<std::string>{"other", "next", "behind"}));
+  EXPECT_EQ(queues_.delayed(), 0U);
+}
+
+TEST_F(ManualWorkQueuesTest, SuspensionEndsAtItsMoment) {
+  const auto work = suspendable();
+  work->async([&] { work->suspend(3s, note("next")); });
+  work->async(note("behind"));
+  queues_.advance(3s - 1ns);
+  EXPECT_TRUE(ran_.empty());
+  queues_.advance(1ns);
+  EXPECT_EQ(ran_, (std::vector<std::string>{"next", "behind"}));
+}
+
+TEST_F(ManualWorkQueuesTest, ResumingWithoutASuspensionDoesNothing) {
+  const auto work = suspendable();
+  work->resume();
+  EXPECT_EQ(queues_.runUntilIdle(), 0U);
+}
+
+TEST_F(ManualWorkQueuesTest, DropAllDestroysWhatASuspendedQueueHolds) {
+  auto work = suspendable();
+  const std::weak_ptr<platform::WorkQueue> watched = work;
+  work->async([work] { work->suspend(1h, [work] {}); });
+  queues_.runUntilIdle();
+  work.reset();
+  EXPECT_FALSE(watched.expired());
+  queues_.dropAll();
+  EXPECT_TRUE(watched.expired());
 }
 
 TEST_F(ManualWorkQueuesTest, WorkMayBeHandedOverByManyThreadsWhileItRuns) {
