@@ -1,0 +1,58 @@
+// RecorderRtcReportingService: the real-time-communication reporting service as the recorder stands in for it. Making a
+// session, each message and each flush are recorded under back-end "rtc" with the session's number, which counts from
+// 1 in each run.
+//
+// How it answers is told by the configuration: which backends a start finds, how late it says so, and whether it hands
+// out tokens at all. Completions come on a thread of its own, each at its moment, so a late one holds up no other.
+//
+// Owner: the entry point; sessions may outlive it, but not the recorder. Threads: any.
+#pragma once
+
+#include <atomic>
+#include <chrono>
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "platform/Clock.h"
+#include "platform/RtcReportingService.h"
+
+namespace tarn::recorder {
+
+class Recorder;
+
+class RecorderRtcReportingService final : public platform::RtcReportingService {
+ public:
+  struct Behaviour {
+    bool available = true;                               // false: no token is handed out
+    std::optional<std::vector<std::string>> backends{};  // what a start's completion reports; nothing: no list
+    std::chrono::milliseconds startDelay{0};             // how late it comes
+  };
+
+  // The recorder and the clock outlive this and its sessions.
+  RecorderRtcReportingService(Recorder& recorder, const platform::Clock& clock, Behaviour behaviour);
+  RecorderRtcReportingService(const RecorderRtcReportingService&) = delete;
+  RecorderRtcReportingService& operator=(const RecorderRtcReportingService&) = delete;
+  // Completions that have not come by then never come.
+  ~RecorderRtcReportingService() override;
+
+  std::optional<std::string> newHierarchyToken(const std::optional<std::string>& parentToken) override;
+  std::shared_ptr<platform::RtcReportingSession> createSession(
+      const plist::Dictionary& sessionInfo, const plist::Dictionary& userInfo,
+      const std::optional<std::vector<std::string>>& frameworksToCheck) override;
+
+ private:
+  class Completions;
+  class Session;
+
+  Recorder& recorder_;
+  const platform::Clock& clock_;
+  const bool available_;
+  const std::shared_ptr<Completions> completions_;
+  std::atomic<std::uint64_t> tokens_{0};
+  std::atomic<std::int64_t> sessions_{0};
+};
+
+}  // namespace tarn::recorder
