@@ -39,9 +39,9 @@ class TarnReportingSessionWorkerProtocol {
   // The owning session; nothing while it is going away.
   std::shared_ptr<TarnReportingSession> session() const noexcept { return session_.lock(); }
   void setSession(std::weak_ptr<TarnReportingSession> session) noexcept { session_ = std::move(session); }
-  // Whether the worker runs; kept by the session.
-  bool started() const noexcept { return started_; }
-  void setStarted(bool started) noexcept { started_ = started; }
+  // Whether the worker runs; kept by the session. A worker whose back-end has a say in it keeps it itself.
+  virtual bool started() const noexcept { return started_; }
+  virtual void setStarted(bool started) noexcept { started_ = started; }
 
  private:
   std::weak_ptr<TarnReportingSession> session_;

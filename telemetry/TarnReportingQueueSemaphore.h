@@ -1,0 +1,42 @@
+// TarnReportingQueueSemaphore: a counting semaphore on which a queue waits instead of a thread.
+//
+// What the waiter would do behind its wait it hands over as `then`; its queue is suspended until a signal comes or the
+// time is up. A signal that nobody waits for is kept for the next wait.
+//
+// Owner: whoever waits; it lives until `then` was called. Threads: signal() any, wait() the queue's.
+#pragma once
+
+#include <chrono>
+#include <cstddef>
+#include <memory>
+#include <mutex>
+
+#include "platform/UniqueFunction.h"
+#include "platform/WorkQueue.h"
+
+namespace tarn {
+
+class TarnReportingQueueSemaphore {
+ public:
+  // Whether a signal came in time.
+  using Then = platform::UniqueFunction<void(bool signalled)>;
+
+  TarnReportingQueueSemaphore() = default;
+  TarnReportingQueueSemaphore(const TarnReportingQueueSemaphore&) = delete;
+  TarnReportingQueueSemaphore& operator=(const TarnReportingQueueSemaphore&) = delete;
+
+  void signal();
+  // By work of `queue`, as the last thing it does. `then` runs on the queue, ahead of all that waits there: at once
+  // when there is a signal, else when one comes or `longest` has passed.
+  void wait(const std::shared_ptr<platform::SuspendableQueue>& queue, std::chrono::nanoseconds longest, Then then);
+
+ private:
+  bool take();
+
+  std::mutex mutex_;
+  // Guarded by mutex_.
+  std::size_t count_ = 0;
+  std::shared_ptr<platform::SuspendableQueue> waiter_;
+};
+
+}  // namespace tarn
