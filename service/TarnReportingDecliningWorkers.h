@@ -38,10 +38,4 @@ class TarnReportingSessionDriverSnapshotWorker
   static constexpr std::string_view kClassName = "TarnReportingSessionDriverSnapshotWorker";
 };
 
-class TarnReportingSessionRtcWorker : public TarnReportingDecliningConsumer<TarnReportingSessionRtcWorker> {
- public:
-  static constexpr std::string_view kClassName = "TarnReportingSessionRtcWorker";
-  static bool handleSingleMessageSession() { return true; }
-};
-
 }  // namespace tarn

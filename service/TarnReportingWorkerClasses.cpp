@@ -20,6 +20,7 @@
 #include "session/TarnReportingSessionSummaryWorker.h"
 #include "session/TarnReportingSessionTallyWorker.h"
 #include "telemetry/TarnReportingSessionAudioRegistrationWorker.h"
+#include "telemetry/TarnReportingSessionRtcWorker.h"
 #include "telemetry/TarnReportingSessionTraceWorker.h"
 
 namespace tarn {

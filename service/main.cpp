@@ -3,6 +3,7 @@
 // The process ends without tearing the parts down: what the back-ends hold is committed, then it exits at once.
 // Sessions are not stopped.
 #include <algorithm>
+#include <chrono>
 #include <cstdlib>
 #include <iostream>
 #include <limits>
@@ -47,6 +48,7 @@
 #include "platform/recorder/Recorder.h"
 #include "platform/recorder/RecorderGyreService.h"
 #include "platform/recorder/RecorderPylonService.h"
+#include "platform/recorder/RecorderRtcReportingService.h"
 #include "platform/recorder/RecorderSnareService.h"
 #include "platform/recorder/RecorderTallyService.h"
 #include "platform/recorder/RecorderTattleService.h"
@@ -62,6 +64,8 @@ namespace {
 using namespace linux_host;
 
 constexpr std::string_view kModule = "main";
+// How long the end waits for the workers' own queues.
+constexpr std::chrono::milliseconds kSettleTime{500};
 
 // What is read before anything runs.
 struct Setup {
@@ -96,6 +100,16 @@ std::string temporaryDirectoryOf(const Setup& setup) {
   return setup.options.stateDirectory + "/tmp";
 }
 
+recorder::RecorderRtcReportingService::Behaviour behaviourOf(const HostConfiguration::Rtc& rtc) {
+  recorder::RecorderRtcReportingService::Behaviour behaviour;
+  behaviour.available = rtc.available;
+  if (!rtc.noBackends) {
+    behaviour.backends = rtc.backends;
+  }
+  behaviour.startDelay = rtc.startDelay;
+  return behaviour;
+}
+
 LinuxFileSystem::Directories directoriesOf(const Setup& setup) {
   return {setup.configuration.paths.diagnosticLogs.value_or(setup.options.stateDirectory) + "/DiagnosticLogs",
           temporaryDirectoryOf(setup)};
@@ -114,6 +128,7 @@ class Host final : public platform::ProcessControl {
         wattlog_(recorder_, clock),
         pylon_(recorder_, clock),
         snare_(recorder_, clock, randomSource_, setup.configuration.snare.refuse),
+        rtc_(recorder_, clock, behaviourOf(setup.configuration.rtc)),
         workQueues_(clock, loop_.queue()),
         tattle_(recorder_, clock, workQueues_),
         gyre_(recorder_, clock),
@@ -137,6 +152,7 @@ class Host final : public platform::ProcessControl {
     if (const std::string error = SignalSource::start(signals_, loop_, [this](int) { loop_.stop(); }); !error.empty()) {
       return refuse(error, kExitFailure);
     }
+    setUpPauses();
     startRecorder();
     TarnReportingInstallFacilities(&facilities_);
     TarnReportingSession::setAllWorkerClasses(TarnReportingWorkerClasses());
@@ -171,9 +187,14 @@ class Host final : public platform::ProcessControl {
   }
 
  private:
-  void startRecorder() {
+  // What comes in is held up while what it becomes piles up.
+  void setUpPauses() {
     recorder_.setRoomHandler([this] { connections_.resumeRequests(); });
-    connections_.gate.setPauseSource([this] { return recorder_.isFull(); });
+    workQueues_.setRoomHandler([this] { connections_.resumeRequests(); });
+    connections_.gate.setPauseSource([this] { return recorder_.isFull() || workQueues_.isFull(); });
+  }
+
+  void startRecorder() {
     recorder_.start();
     // A large file is read through first; until that is over nothing could be committed in time.
     recorder_.waitUntilOpened();
@@ -182,7 +203,7 @@ class Host final : public platform::ProcessControl {
   plist::Dictionary status() {
     const recorder::RecorderCounters counters = recorder_.counters();
     return connections_.ledger.status(
-        service_->sessionCount(), loop_.queue()->waiting(),
+        service_->sessionCount(), loop_.queue()->waiting() + workQueues_.unfinished(),
         {counters.handedOver, counters.committed, counters.waiting, counters.expired, counters.failed});
   }
 
@@ -191,8 +212,17 @@ class Host final : public platform::ProcessControl {
     serviceManager_.notifyStopping();
     watchdog_.stop();
     listener_->close();
+    settleQueues();
     performanceTrace_.shutdown();  // a trace that isn't finished leaves no half file
     recorder_.shutdown();
+  }
+
+  // What the workers' own queues hold reaches the recorder too, unless a back-end keeps it waiting.
+  void settleQueues() {
+    if (!workQueues_.settle(kSettleTime)) {
+      hostLog(log_, kHostCategory, platform::LogLevel::Default, kModule,
+              std::to_string(workQueues_.unfinished()) + " pieces of work of the workers' queues are left undone");
+    }
   }
 
   platform::Log& log_;
@@ -205,6 +235,7 @@ class Host final : public platform::ProcessControl {
   recorder::RecorderPylonService pylon_;
   LinuxRandomSource randomSource_;
   recorder::RecorderSnareService snare_;
+  recorder::RecorderRtcReportingService rtc_;
   LinuxWorkQueues workQueues_;
   recorder::RecorderTattleService tattle_;
   recorder::RecorderGyreService gyre_;
@@ -248,6 +279,7 @@ class Host final : public platform::ProcessControl {
                                          .snare = &snare_,
                                          .tattle = &tattle_,
                                          .gyre = &gyre_,
+                                         .rtcReporting = &rtc_,
                                          .performanceTrace = &performanceTrace_,
                                          .traceAnalysis = &traceAnalysis_,
                                          .perfDataWriters = &perfDataWriters_,

@@ -30,7 +30,7 @@ TEST_F(RecorderFile, AFileThatIsNoDatabaseIsSetAsideAndAFreshOneBegun) {
 }
 
 TEST_F(RecorderFile, OnlyEventsThatSomebodyWantsAreRecorded) {
-  ASSERT_TRUE(startConfigured("[tally]\nin_use = [\"sys.oxbow.standalone.*\"]\n"));
+  ASSERT_TRUE(startConfigured("[tally]\nin_use = [\"sys.oxbow.standalone.*\"]\n[rtc]\navailable = false\n"));
   play(R"({"op":"sendMessage","category":4,"type":1,"message":{}}
 {"op":"sendMessage","category":4,"type":2,"message":{}}
 )");
