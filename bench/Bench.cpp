@@ -30,6 +30,7 @@ constexpr Figure kFigures[] = {
     {"growth", &measureGrowth},
     {"signposts", &measureSignposts},
     {"stop", &measureStop},
+    {"mirror", &measureMirror},
 };
 
 std::string besideThisProgram(const std::string& name) {

@@ -17,5 +17,6 @@ void measureEquality(const Settings& settings, Table& table);
 void measureGrowth(const Settings& settings, Table& table);
 void measureSignposts(const Settings& settings, Table& table);
 void measureStop(const Settings& settings, Table& table);
+void measureMirror(const Settings& settings, Table& table);
 
 }  // namespace tarn::bench

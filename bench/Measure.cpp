@@ -65,6 +65,10 @@ std::string megabytes(double count) {
   return withUnit(count / 1e6, " MB");
 }
 
+std::string counted(double count, const std::string& what) {
+  return std::to_string(static_cast<int>(count + 0.5)) + " " + what;
+}
+
 std::string times(double ratio) {
   char text[32];
   std::snprintf(text, sizeof text, "%.2f", ratio);

@@ -46,5 +46,7 @@ std::string perSecond(double rate);
 std::string bytes(double count);
 std::string megabytes(double count);
 std::string times(double ratio);
+// "9 threads"
+std::string counted(double count, const std::string& what);
 
 }  // namespace tarn::bench

@@ -33,6 +33,7 @@ ServiceProcess::~ServiceProcess() {
 void ServiceProcess::writeConfiguration(const ServiceSetup& setup) const {
   std::ofstream file(directory_.path() + "/config.toml");
   file << "[tally]\nin_use = [" << (setup.recordsEvents ? "\"*\"" : "") << "]\n"
+       << "[rtc]\navailable = " << (setup.mirrorsSessions ? "true" : "false") << '\n'
        << "[recorder]\nmax_megabytes = " << setup.maxMegabytes << '\n';
 }
 

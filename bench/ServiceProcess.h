@@ -21,8 +21,9 @@ struct Settings {
 };
 
 struct ServiceSetup {
-  bool recordsEvents = false;  // whether somebody wants every event, or nobody any
-  int maxMegabytes = 65536;    // retention; the default never bites here
+  bool recordsEvents = false;    // whether somebody wants every event, or nobody any
+  int maxMegabytes = 65536;      // retention; the default never bites here
+  bool mirrorsSessions = false;  // whether the real-time-communication reporting service takes sessions
 };
 
 class ServiceProcess {

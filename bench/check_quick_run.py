@@ -35,12 +35,17 @@ ROWS = [
     ("trace points off, intake with six more", ("without",)),
     ("trace points off, one alone", ("an empty loop",)),
     ("trace points on, one alone", ("off",)),
+    ("mirror, hand-over of a message", ("",)),
+    ("mirror, stop of a long session", ("",)),
+    ("mirror, stop until its summary event is sent", ("",)),
+    ("threads of the service, 1000 live sessions", ("",)),
+    ("resident bytes a live session", ("",)),
 ]
 for kind in ("ordinary", "merging pairs", "ending segments", "ordinary, summary file"):
     ROWS.append((f"stop of 10^3 messages, {kind}, a message", ("in all",)))
     ROWS.append((f"stop of 10^4 messages, {kind}, a message", ("in all",)))
     ROWS.append((f"stop of 10^4 messages, {kind}, extra memory", ("the log",)))
-FIGURE = re.compile(r"^\d+(\.\d+)? (ms|us|ns|MB|B|k/s)$")
+FIGURE = re.compile(r"^\d+(\.\d+)? (ms|us|ns|MB|B|k/s|threads)$")
 PEER = re.compile(r"^(?P<name>.+?) \d+(\.\d+)? (ms|us|ns|MB|B|k/s)( \(.*\))?$")
 
 
