@@ -136,8 +136,11 @@ std::vector<double> measureHandOver(std::size_t count) {
 }
 
 // Seconds for which the stop keeps the session, and until the summary event is sent and the service flushed.
-std::vector<double> measureStop(std::size_t count) {
+std::vector<double> measureStop(std::size_t count, bool mirrored) {
   Platform platform;
+  if (!mirrored) {
+    TarnReportingSession::setAllWorkerClasses({});
+  }
   const auto session = makeSession();
   session->start();
   while (session->messages().size() < count) {
@@ -147,7 +150,7 @@ std::vector<double> measureStop(std::size_t count) {
   const double start = nowSeconds();
   session->stop();
   const double stopped = nowSeconds();
-  platform.service().waitForFlushes(1);
+  platform.service().waitForFlushes(mirrored ? 1 : 0);
   return {stopped - start, nowSeconds() - start};
 }
 
@@ -193,12 +196,14 @@ std::vector<double> measureLiveSessions(const Settings& settings) {
 void measureMirror(const Settings& settings, Table& table) {
   Samples handOvers;
   Samples stops;
+  Samples plainStops;
   Samples summaries;
   Samples threads;
   Samples sessions;
   for (int round = 0; round < settings.rounds; ++round) {
     handOvers.push_back(measureInChild([&] { return measureHandOver(settings.count(kHandedOver)); }).front());
-    const std::vector<double> stop = measureInChild([&] { return measureStop(settings.count(kStopped)); });
+    const std::vector<double> stop = measureInChild([&] { return measureStop(settings.count(kStopped), true); });
+    plainStops.push_back(measureInChild([&] { return measureStop(settings.count(kStopped), false); }).front());
     stops.push_back(stop[0]);
     summaries.push_back(stop[1]);
     const std::vector<double> live = measureLiveSessions(settings);
@@ -207,7 +212,12 @@ void measureMirror(const Settings& settings, Table& table) {
   }
   table.addWithTarget({"mirror, hand-over of a message", nanoseconds(median(handOvers)), "", "", "<= 300 ns", {}},
                       median(handOvers), kHandOverTarget);
-  table.add({"mirror, stop of a long session", microseconds(median(stops)), "", "", "", {}});
+  table.add({"mirror, stop of a long session",
+             microseconds(median(stops)),
+             "without a mirror " + microseconds(median(plainStops)),
+             times(median(stops) / median(plainStops)),
+             "",
+             {}});
   table.add({"mirror, stop until its summary event is sent", microseconds(median(summaries)), "", "", "", {}});
   table.add({"threads of the service, 1000 live sessions", counted(median(threads), "threads"), "", "", "", {}});
   table.add({"resident bytes a live session", bytes(median(sessions)), "", "", "", {}});

@@ -36,7 +36,7 @@ ROWS = [
     ("trace points off, one alone", ("an empty loop",)),
     ("trace points on, one alone", ("off",)),
     ("mirror, hand-over of a message", ("",)),
-    ("mirror, stop of a long session", ("",)),
+    ("mirror, stop of a long session", ("without a mirror",)),
     ("mirror, stop until its summary event is sent", ("",)),
     ("threads of the service, 1000 live sessions", ("",)),
     ("resident bytes a live session", ("",)),
