@@ -10,8 +10,6 @@
 #include "derived/TarnReportingSessionVolumeMessagesWorker.h"
 #include "diagnostics/TarnReportingSessionDPWorker.h"
 #include "diagnostics/TarnReportingSessionMemoryLogWorker.h"
-#include "diagnostics/TarnReportingSessionSnareWorker.h"
-#include "diagnostics/TarnReportingSessionTattleWorker.h"
 #include "diagnostics/TarnReportingSessionPylonWorker.h"
 #include "diagnostics/TarnReportingSessionSnareWorker.h"
 #include "diagnostics/TarnReportingSessionTattleWorker.h"
