@@ -10,6 +10,7 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <utility>
 
 #include "derived/TarnReportingSystemMonitor.h"
 #include "platform/Facilities.h"
@@ -64,7 +65,7 @@ namespace {
 using namespace linux_host;
 
 constexpr std::string_view kModule = "main";
-// How long the end waits for the workers' own queues.
+// For how long the end waits for the workers' own queues without seeing them get shorter.
 constexpr std::chrono::milliseconds kSettleTime{500};
 
 // What is read before anything runs.
@@ -219,9 +220,14 @@ class Host final : public platform::ProcessControl {
 
   // What the workers' own queues hold reaches the recorder too, unless a back-end keeps it waiting.
   void settleQueues() {
-    if (!workQueues_.settle(kSettleTime)) {
-      hostLog(log_, kHostCategory, platform::LogLevel::Default, kModule,
-              std::to_string(workQueues_.unfinished()) + " pieces of work of the workers' queues are left undone");
+    std::size_t left = workQueues_.unfinished();
+    while (!workQueues_.settle(kSettleTime)) {
+      const std::size_t before = std::exchange(left, workQueues_.unfinished());
+      if (left >= before) {
+        hostLog(log_, kHostCategory, platform::LogLevel::Default, kModule,
+                std::to_string(left) + " pieces of work of the workers' queues are left undone");
+        return;
+      }
     }
   }
 
