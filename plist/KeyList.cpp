@@ -77,11 +77,11 @@ KeyListBody* extendedBefore(const KeyListBody& body, const Key& key) noexcept {
   return extended;
 }
 
+// The caller holds both.
 void rememberExtended(KeyListBody& body, KeyListBody* extended) noexcept {
   KeyListBody* none = nullptr;
-  detail::retainKeyList(extended);
-  if (!body.extended.compare_exchange_strong(none, extended, std::memory_order_release, std::memory_order_relaxed)) {
-    detail::releaseKeyList(extended);
+  if (body.extended.compare_exchange_strong(none, extended, std::memory_order_release, std::memory_order_relaxed)) {
+    detail::retainKeyList(extended);
   }
 }
 

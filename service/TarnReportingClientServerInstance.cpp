@@ -316,11 +316,16 @@ void TarnReportingClientServerInstance::send(plist::Dictionary message, std::uin
     return;
   }
   const auto sessions = service->findReportingSessionsForIDs(reporterIDs);
-  for (const auto& session : sessions) {
-    // Each session changes its own; the last one, mostly the only one, needs no copy for it.
-    plist::Dictionary own = &session == &sessions.back() ? std::move(message) : message;
-    session->sendMessage(std::make_shared<TarnReportingSessionMessage>(
+  const auto sendTo = [category, type](TarnReportingSession& session, plist::Dictionary own) {
+    session.sendMessage(std::make_shared<TarnReportingSessionMessage>(
         std::move(own), static_cast<AudioEventCategory>(category), static_cast<AudioEventType>(type)));
+  };
+  // Each session changes its own; the last one, mostly the only one, needs no copy for it.
+  for (std::size_t i = 0; i + 1 < sessions.size(); ++i) {
+    sendTo(*sessions[i], message);
+  }
+  if (!sessions.empty()) {
+    sendTo(*sessions.back(), std::move(message));
   }
   reply(std::nullopt);
 }

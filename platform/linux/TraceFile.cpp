@@ -84,7 +84,7 @@ MaybeError TraceFile::open() {
   partialPath_ = std::move(path);
   put("{\"traceEvents\":[\n{\"ph\":\"M\",\"pid\":");
   put(std::to_string(process_));
-  put(",\"name\":\"process_name\",\"args\":{\"name\":");
+  put(R"(,"name":"process_name","args":{"name":)");
   put(jsonOf(threadName(process_)));
   put("}}");
   return flush();
@@ -98,11 +98,11 @@ void TraceFile::write(const SignpostRecord& record) {
     event_ += ",\"dur\":";
     appendMicroseconds(event_, record.duration);
   } else {
-    event_ += ",\"s\":\"t\"";
+    event_ += R"(,"s":"t")";
   }
   appendNames(record.signpost);
   if (facts_.writesArguments && !record.signpost.argument.name.empty()) {
-    event_ += ",\"args\":{\"";
+    event_ += R"(,"args":{")";
     event_ += record.signpost.argument.name;
     event_ += "\":";
     appendNumber(event_, record.signpost.argument.value);
@@ -115,11 +115,11 @@ void TraceFile::writeCounter(std::string_view name, std::string_view unit, std::
                              std::chrono::nanoseconds at) {
   if (full_) return;
   beginEvent("C", at, process_);
-  event_ += ",\"cat\":\"";
+  event_ += R"(,"cat":")";
   event_ += platform::kSignpostSubsystem;
-  event_ += ",load\",\"name\":\"";
+  event_ += R"(,load","name":")";
   event_ += name;
-  event_ += "\",\"args\":{\"";
+  event_ += R"(","args":{")";
   event_ += unit;
   event_ += "\":";
   appendNumber(event_, value);
@@ -130,9 +130,9 @@ void TraceFile::writeCounter(std::string_view name, std::string_view unit, std::
 void TraceFile::writeLost(std::uint64_t count, std::chrono::nanoseconds at) {
   leftOut_ += count;
   beginEvent("i", at, process_);
-  event_ += ",\"s\":\"p\",\"cat\":\"";
+  event_ += R"(,"s":"p","cat":")";
   event_ += platform::kSignpostSubsystem;
-  event_ += ",trace\",\"name\":\"tarnkit.eventsLost\",\"args\":{\"count\":";
+  event_ += R"(,trace","name":"tarnkit.eventsLost","args":{"count":)";
   appendNumber(event_, count);
   event_ += '}';
   static_cast<void>(endEvent(at));
@@ -168,7 +168,7 @@ platform::Outcome<std::string> TraceFile::finish() {
 void TraceFile::beginEvent(std::string_view phase, std::chrono::nanoseconds at, std::int32_t thread) {
   event_ = ",\n{\"ph\":\"";
   event_ += phase;
-  event_ += "\",\"pid\":";
+  event_ += R"(","pid":)";
   appendNumber(event_, process_);
   event_ += ",\"tid\":";
   appendNumber(event_, thread);
@@ -178,11 +178,11 @@ void TraceFile::beginEvent(std::string_view phase, std::chrono::nanoseconds at, 
 
 // Names are texts of this program's source and of its tables: nothing in them asks for an escape.
 void TraceFile::appendNames(const platform::Signpost& signpost) {
-  event_ += ",\"cat\":\"";
+  event_ += R"(,"cat":")";
   event_ += platform::kSignpostSubsystem;
   event_ += ',';
   event_ += nameOf(signpost.category);
-  event_ += "\",\"name\":\"";
+  event_ += R"(","name":")";
   event_ += signpost.subject;
   event_ += '.';
   event_ += signpost.verb;
@@ -195,7 +195,7 @@ void TraceFile::nameThread(std::int32_t thread, std::chrono::nanoseconds at) {
   appendNumber(event_, process_);
   event_ += ",\"tid\":";
   appendNumber(event_, thread);
-  event_ += ",\"name\":\"thread_name\",\"args\":{\"name\":";
+  event_ += R"(,"name":"thread_name","args":{"name":)";
   plist::appendJsonText(event_, threadName(thread));
   event_ += "}";
   static_cast<void>(endEvent(at));
@@ -208,9 +208,9 @@ bool TraceFile::endEvent(std::chrono::nanoseconds at) {
     full_ = true;
     const std::string beyond = std::exchange(event_, {});
     beginEvent("i", at, process_);
-    event_ += ",\"s\":\"p\",\"cat\":\"";
+    event_ += R"(,"s":"p","cat":")";
     event_ += platform::kSignpostSubsystem;
-    event_ += ",trace\",\"name\":\"tarnkit.traceFull\"}";
+    event_ += R"(,trace","name":"tarnkit.traceFull"})";
     put(event_);
   }
   if (full_) {
