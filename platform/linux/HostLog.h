@@ -13,7 +13,8 @@ namespace tarn::linux_host {
 inline constexpr platform::LogCategory kConnectionCategory{"sys.oxbow.tarnkit", "tarnrc"};
 // Everything else of the host: listener, loop, signals, watchdog.
 inline constexpr platform::LogCategory kHostCategory{"sys.oxbow.tarnkit", "tarnrs"};
-
+// The driver report channels.
+inline constexpr platform::LogCategory kDriverCategory{"sys.oxbow.tarnkit", "tarnrd"};
 // The performance traces and their analysis.
 inline constexpr platform::LogCategory kTraceCategory{"sys.oxbow.tarnkit", "tarnrt"};
 

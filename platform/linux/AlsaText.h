@@ -1,0 +1,55 @@
+// The kernel's texts on a PCM substream, /proc/asound/card*/pcm*/sub*/: its "status" and its "info".
+//
+//   closed                              one word while nobody has it open, else lines "key: value":
+//
+//   state: RUNNING
+//   owner_pid   : 1234
+//   trigger_time: 4242.424242424        seconds; when it was last started, stopped or paused, by the same clock as
+//   tstamp      : 4250.000000000        this, the time of the reading
+//   delay       : 512
+//   avail       : 15872
+//   avail_max   : 16000
+//   -----
+//   hw_ptr      : 363636                frames that the hardware has passed since the stream was prepared
+//   appl_ptr    : 364148
+//   xrun_counter: 2                     since it was opened; only of a kernel that counts them
+//
+// Lines may come in any order, and others are passed over. Threads: any. Nothing is thrown.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+
+namespace tarn::linux_host {
+
+// The states that are told apart, by their names; kAlsaStates[0] is that of a substream that nobody has open, the last
+// one stands for names that we don't know.
+inline constexpr std::string_view kAlsaStates[] = {"closed",   "OPEN",   "SETUP",     "PREPARED",     "RUNNING", "XRUN",
+                                                   "DRAINING", "PAUSED", "SUSPENDED", "DISCONNECTED", "other"};
+inline constexpr std::size_t kAlsaStateCount = sizeof kAlsaStates / sizeof kAlsaStates[0];
+inline constexpr std::size_t kAlsaXrun = 5;
+
+struct AlsaStatus {
+  std::size_t state = 0;                           // index into kAlsaStates
+  std::optional<std::int64_t> triggerNanoseconds;  // by a clock of the stream's choice
+  std::optional<std::int64_t> nowNanoseconds;      // by the same one
+  std::optional<std::uint64_t> hardwarePointer;    // frames
+  std::optional<std::uint64_t> overruns;           // none: the kernel doesn't tell
+};
+
+struct AlsaInfo {
+  bool isPlayback = false;
+  std::string id;  // "ALC287 Analog"; printable ASCII, bounded
+};
+
+// Nothing when the text tells no state.
+std::optional<AlsaStatus> parseAlsaStatus(std::string_view text);
+// Nothing when the text tells no direction.
+std::optional<AlsaInfo> parseAlsaInfo(std::string_view text);
+// A name of the kernel's that is safe everywhere: its first line, printable ASCII with "?" for anything else, bounded.
+std::string alsaName(std::string_view text);
+
+}  // namespace tarn::linux_host

@@ -1,0 +1,40 @@
+// LinuxFlumeService: the driver report channels of all sources as one service.
+//
+// Every look-up and every sample reads the sources anew. A channel is known by driver, group, sub-group and name; of
+// two that are known alike the one of the earlier source counts. It never fails: what a source can't read is missing,
+// and the source says so in the log.
+//
+// A difference takes buckets by their position and states by their name. A value is later minus earlier, also below
+// zero. A channel that changed its format counts as it is now.
+//
+// Owner: the entry point; the sources outlive it. Threads: those of the sources.
+#pragma once
+
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "platform/FlumeService.h"
+
+namespace tarn::linux_host {
+
+class FlumeSource;
+
+class LinuxFlumeService final : public platform::FlumeService {
+ public:
+  explicit LinuxFlumeService(std::vector<FlumeSource*> sources);
+
+  platform::Outcome<std::shared_ptr<const platform::FlumeChannelSet>> copyChannels(
+      const std::optional<std::string>& group, const std::optional<std::string>& subGroup) override;
+  Subscribed subscribe(const platform::FlumeChannelSet& channels) override;
+  SamplesOutcome createSamples(platform::FlumeSubscription& subscription,
+                               const platform::FlumeChannelSet& subscribedChannels) override;
+  SamplesOutcome createDelta(const std::shared_ptr<const platform::FlumeSamples>& earlier,
+                             const std::shared_ptr<const platform::FlumeSamples>& later) override;
+
+ private:
+  const std::vector<FlumeSource*> sources_;
+};
+
+}  // namespace tarn::linux_host
