@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "derived/TarnReportingSystemMonitor.h"
+#include "diagnostics/TarnReportingDriverUtility.h"
 #include "diagnostics/TarnReportingSnareProcessState.h"
 #include "platform/testing/FakePlatform.h"
 #include "plist/Dictionary.h"
@@ -54,6 +55,7 @@ class ServiceFixture : public ::testing::Test {
     service_.reset();
     TarnReportingSystemMonitor::reset();
     TarnReportingSnareProcessState::reset();
+    TarnReportingDriverUtility::reset();
     TarnReportingSession::setAllWorkerClasses({});
   }
 

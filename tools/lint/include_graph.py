@@ -22,7 +22,6 @@ FLOORS = (
     ("service/TarnReportingService*", "front"),
     ("service/TarnReportingClient*", "front"),
     ("service/TarnReportingSession*", "front"),
-    ("service/TarnReportingDecliningWorkers.h", "front"),
     ("service/TarnReportingWorkerClasses.h", "front"),
     ("service/*", "vocabulary"),
     ("session/*", "session"),
