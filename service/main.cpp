@@ -15,10 +15,12 @@
 #include "derived/TarnReportingSystemMonitor.h"
 #include "platform/Facilities.h"
 #include "platform/ProcessControl.h"
+#include "platform/linux/AlsaFlume.h"
 #include "platform/linux/ConnectionHost.h"
 #include "platform/linux/DescriptorLimit.h"
 #include "platform/linux/FileLock.h"
 #include "platform/linux/FileNotificationCenter.h"
+#include "platform/linux/FlumeFiles.h"
 #include "platform/linux/HostConfiguration.h"
 #include "platform/linux/HostLog.h"
 #include "platform/linux/HostPaths.h"
@@ -28,6 +30,7 @@
 #include "platform/linux/LinuxCommandRunner.h"
 #include "platform/linux/LinuxConditions.h"
 #include "platform/linux/LinuxFileSystem.h"
+#include "platform/linux/LinuxFlumeService.h"
 #include "platform/linux/LinuxLocalCalendar.h"
 #include "platform/linux/LinuxPerfDataWriters.h"
 #include "platform/linux/LinuxPerformanceTraceService.h"
@@ -65,6 +68,7 @@ namespace {
 using namespace linux_host;
 
 constexpr std::string_view kModule = "main";
+constexpr const char* kSoundHardware = "/proc/asound";
 // For how long the end waits for the workers' own queues without seeing them get shorter.
 constexpr std::chrono::milliseconds kSettleTime{500};
 
@@ -116,6 +120,10 @@ LinuxFileSystem::Directories directoriesOf(const Setup& setup) {
           temporaryDirectoryOf(setup)};
 }
 
+std::string flumeFolderOf(const Setup& setup) {
+  return setup.configuration.paths.flume.value_or(setup.options.stateDirectory + "/flume");
+}
+
 // The machine's facilities, the recorder in place of its back-ends, and the service on top.
 class Host final : public platform::ProcessControl {
  public:
@@ -137,6 +145,8 @@ class Host final : public platform::ProcessControl {
         defaults_(setup.options.stateDirectory + "/defaults", log),
         notifications_(setup.options.stateDirectory + "/notifications", log),
         fileSystem_(directoriesOf(setup)),
+        flumeFiles_(flumeFolderOf(setup), log),
+        alsaFlume_(kSoundHardware, log, clock),
         signposts_(clock),
         tracePoints_(signposts_),
         performanceTrace_({signposts_, fileSystem_, clock, processFacts_, log}),
@@ -250,6 +260,9 @@ class Host final : public platform::ProcessControl {
   FileNotificationCenter notifications_;
   LinuxProcessFacts processFacts_;
   LinuxFileSystem fileSystem_;
+  FlumeFiles flumeFiles_;
+  AlsaFlume alsaFlume_;
+  LinuxFlumeService flume_{{&flumeFiles_, &alsaFlume_}};
   LinuxSignposts signposts_;
   LinuxTracePoints tracePoints_;
   LinuxPerformanceTraceService performanceTrace_;
@@ -285,6 +298,7 @@ class Host final : public platform::ProcessControl {
                                          .snare = &snare_,
                                          .tattle = &tattle_,
                                          .gyre = &gyre_,
+                                         .flume = &flume_,
                                          .rtcReporting = &rtc_,
                                          .performanceTrace = &performanceTrace_,
                                          .traceAnalysis = &traceAnalysis_,
