@@ -31,6 +31,7 @@ constexpr Figure kFigures[] = {
     {"signposts", &measureSignposts},
     {"stop", &measureStop},
     {"mirror", &measureMirror},
+    {"diagnostics", &measureDiagnostics},
 };
 
 std::string besideThisProgram(const std::string& name) {

@@ -2,10 +2,10 @@
 
 namespace tarn::bench {
 
-std::shared_ptr<TarnReportingSession> makeSession() {
+std::shared_ptr<TarnReportingSession> makeSession(AudioServiceType serviceType) {
   const plist::Dictionary configuration{{"HostApplicationDisplayID", "sys.oxbow.music"}};
   auto session = TarnReportingSession::initWithID(kReporterID, {1});
-  session->setServiceType(AudioServiceType::Generic);
+  session->setServiceType(serviceType);
   session->updateConfigurationWithContentsOfConfiguration(&configuration);
   session->start();
   return session;
@@ -13,8 +13,7 @@ std::shared_ptr<TarnReportingSession> makeSession() {
 
 TarnReportingSession::MessagePointer Feeder::makeRecord() {
   renumber(request_, ++number_);
-  return std::make_shared<TarnReportingSessionMessage>(request_.dictionary, AudioEventCategory::Playback,
-                                                       AudioEventType::Start);
+  return std::make_shared<TarnReportingSessionMessage>(request_.dictionary, AudioEventCategory::Playback, type_);
 }
 
 }  // namespace tarn::bench

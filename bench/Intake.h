@@ -11,14 +11,15 @@
 
 namespace tarn::bench {
 
-// A running session of the type "generic".
-std::shared_ptr<TarnReportingSession> makeSession();
+// A running session.
+std::shared_ptr<TarnReportingSession> makeSession(AudioServiceType serviceType = AudioServiceType::Generic);
 
 class Feeder {
  public:
   static constexpr std::size_t kWindow = 1000;  // messages that are measured together
 
-  explicit Feeder(TarnReportingSession& session) : session_(session), request_(makeRequest()) {}
+  explicit Feeder(TarnReportingSession& session, AudioEventType type = AudioEventType::Start)
+      : session_(session), request_(makeRequest()), type_(type) {}
 
   void fillTo(std::size_t length) {
     while (session_.messages().size() < length) {
@@ -43,6 +44,7 @@ class Feeder {
 
   TarnReportingSession& session_;
   wire::Request request_;
+  const AudioEventType type_;
   std::uint64_t number_ = 0;
 };
 

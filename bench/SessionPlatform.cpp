@@ -32,6 +32,22 @@ SessionPlatform::SessionPlatform(Tally tally, const std::string& directory)
   TarnReportingSession::setAllWorkerClasses(TarnReportingWorkerClasses());
 }
 
+void SessionPlatform::offerDiagnostics() {
+  constexpr std::string_view kSuite = "sys.oxbow.tarnkit.tarnreporting";
+  fakes_.deviceProperties.set("InternalBuild", true);
+  fakes_.deviceProperties.set("haptics", true);
+  fakes_.defaults.set(kSuite, "enable_gyre", true);
+  fakes_.defaults.set(kSuite, "io_buffer_size", 256);
+  fakes_.defaults.set(kSuite, "io_cycle", 1);
+  fakes_.defaults.set(kSuite, "wait_time", 1000.0);
+  fakes_.defaults.set(kSuite, "ParleyInvalidXyBackOffSeconds", 3600);
+  facilities_.wattlog = &fakes_.wattlog;
+  facilities_.pylon = &fakes_.pylon;
+  facilities_.snare = &fakes_.snare;
+  facilities_.tattle = &fakes_.tattle;
+  facilities_.gyre = &fakes_.gyre;
+}
+
 void SessionPlatform::DroppingTally::sendEventLazy(std::string_view, PayloadCallback payload) {
   keep(payload().size());
 }

@@ -1,6 +1,6 @@
 // SessionPlatform: the platform under sessions that are measured in this process: the fakes of the tests, but for the
 // facilities that a message meets, since the fakes note down everything. The back-ends that a device may lack are
-// missing, so their workers decline.
+// missing until they are offered, so their workers decline.
 //
 // Installed for as long as it lives; one at a time. Threads: one.
 #pragma once
@@ -30,6 +30,10 @@ class SessionPlatform {
   SessionPlatform(const SessionPlatform&) = delete;
   SessionPlatform& operator=(const SessionPlatform&) = delete;
 
+  // From here on the build is internal and the device has all that the diagnostic workers need, their settings on; to
+  // be called before the first session is made. The back-ends are fakes, which a message that nobody wants never meets.
+  void offerDiagnostics();
+
   linux_host::LinuxSignposts& signposts() noexcept { return signposts_; }
 
  private:
@@ -53,7 +57,7 @@ class SessionPlatform {
   DroppingTally tally_;
   NoTracePoints tracePoints_;
   linux_host::LinuxSignposts signposts_{clock_};
-  const platform::Facilities facilities_;
+  platform::Facilities facilities_;
 };
 
 }  // namespace tarn::bench

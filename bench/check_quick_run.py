@@ -35,6 +35,15 @@ ROWS = [
     ("trace points off, intake with six more", ("without",)),
     ("trace points off, one alone", ("an empty loop",)),
     ("trace points on, one alone", ("off",)),
+    ("diagnostic workers, added to a message that none wants", ("intake without",)),
+    ("diagnostic workers, added, last messages held", ("intake without",)),
+    ("Wattlog worker alone, added", ("intake without",)),
+    ("memory log worker alone, added", ("intake without",)),
+    ("Pylon worker alone, added", ("intake without",)),
+    ("Snare worker alone, added", ("intake without",)),
+    ("Snare worker alone, added, last messages held", ("intake without",)),
+    ("DP worker alone, added", ("intake without",)),
+    ("Tattle worker alone, added", ("intake without",)),
     ("mirror, hand-over of a message", ("",)),
     ("mirror, stop of a long session", ("without a mirror",)),
     ("mirror, stop until its summary event is sent", ("",)),
@@ -45,7 +54,7 @@ for kind in ("ordinary", "merging pairs", "ending segments", "ordinary, summary 
     ROWS.append((f"stop of 10^3 messages, {kind}, a message", ("in all",)))
     ROWS.append((f"stop of 10^4 messages, {kind}, a message", ("in all",)))
     ROWS.append((f"stop of 10^4 messages, {kind}, extra memory", ("the log",)))
-FIGURE = re.compile(r"^\d+(\.\d+)? (ms|us|ns|MB|B|k/s|threads)$")
+FIGURE = re.compile(r"^-?\d+(\.\d+)? (ms|us|ns|MB|B|k/s|threads)$")
 PEER = re.compile(r"^(?P<name>.+?) \d+(\.\d+)? (ms|us|ns|MB|B|k/s)( \(.*\))?$")
 
 
