@@ -152,6 +152,10 @@ bool Dictionary::hasKeyWithBlank() const noexcept {
   return body_ != nullptr && body_->keys->hasBlanks;
 }
 
+bool Dictionary::hasKeyWithPrefix(std::string_view prefix) const noexcept {
+  return body_ != nullptr && KeyList::hasPrefix(*body_->keys, prefix);
+}
+
 ValueView Dictionary::get(const Key& key) const noexcept {
   const std::size_t index = body_ == nullptr ? KeyList::npos : detail::indexInKeyList(body_->keys, key);
   return index == KeyList::npos ? ValueView() : Packed::read(itemAt(*body_, index));

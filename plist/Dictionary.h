@@ -83,6 +83,8 @@ class Dictionary {
   bool empty() const noexcept { return body_ == nullptr; }
   KeyList keys() const noexcept;
   bool hasKeyWithBlank() const noexcept;
+  // Whether any key starts with `prefix`. Looks at the keys alone, which is much quicker than walking the entries.
+  bool hasKeyWithPrefix(std::string_view prefix) const noexcept;
 
   // The value under the key, Kind::None when there is none. The view ends with the next change of this dictionary.
   ValueView get(const Key& key) const noexcept;

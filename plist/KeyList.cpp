@@ -262,6 +262,18 @@ bool KeyList::hasBlanks() const noexcept {
   return body_ != nullptr && body_->hasBlanks;
 }
 
+bool KeyList::hasPrefix(const KeyListBody& body, std::string_view prefix) noexcept {
+  if (prefix.empty()) {
+    return body.count != 0;
+  }
+  const auto starts = [prefix](const Key& key) {
+    const std::string_view text = key.text_->text();
+    // The first character alone rules out most keys.
+    return !text.empty() && text.front() == prefix.front() && text.starts_with(prefix);
+  };
+  return std::any_of(body.keys(), body.keys() + body.count, starts);
+}
+
 bool KeyList::equals(std::span<const std::string_view> texts) const noexcept {
   return size() == texts.size() && std::equal(texts.begin(), texts.end(), body_ == nullptr ? nullptr : body_->keys(),
                                               [](std::string_view text, const Key& key) { return text == key.text(); });

@@ -64,6 +64,8 @@ class KeyList {
   friend class Dictionary;
   friend class PackedBuilder;
   explicit KeyList(detail::KeyListBody* body) noexcept : body_(body) {}
+  // Whether any key starts with `prefix`.
+  static bool hasPrefix(const detail::KeyListBody& body, std::string_view prefix) noexcept;
 
   detail::KeyListBody* body_;
 };

@@ -50,10 +50,7 @@ TarnReportingSessionMessages TarnReportingSessionWorkerUtility::combineRapidMess
 }
 
 bool TarnReportingSessionWorkerUtility::isParleyXYerrorMessage(const TarnReportingSessionMessage& message) {
-  const plist::Dictionary& payload = message.message();
-  return std::any_of(payload.begin(), payload.end(), [](const plist::Dictionary::Entry& entry) {
-    return entry.key.text().starts_with(kInvalidCoordinates);
-  });
+  return message.message().hasKeyWithPrefix(kInvalidCoordinates);
 }
 
 }  // namespace tarn

@@ -183,6 +183,20 @@ TEST(Dictionary, TellsWhichKeysItHas) {
   EXPECT_EQ(Dictionary().keysHash(), KeyList().hash());
 }
 
+TEST(Dictionary, TellsWhetherAKeyStartsWithAPrefix) {
+  const Dictionary dictionary{{"", 0}, {"volume", 1}, {"plac_invalid_x", 2}};
+  EXPECT_TRUE(dictionary.hasKeyWithPrefix("plac_invalid_"));
+  EXPECT_TRUE(dictionary.hasKeyWithPrefix("volume"));
+  EXPECT_TRUE(dictionary.hasKeyWithPrefix("v"));
+  EXPECT_TRUE(dictionary.hasKeyWithPrefix(""));
+  EXPECT_FALSE(dictionary.hasKeyWithPrefix("volumes"));
+  EXPECT_FALSE(dictionary.hasKeyWithPrefix("Volume"));
+  EXPECT_FALSE(dictionary.hasKeyWithPrefix("olume"));
+  EXPECT_FALSE((Dictionary{{"key", "volume"}}.hasKeyWithPrefix("volume")));
+  EXPECT_FALSE(Dictionary().hasKeyWithPrefix("volume"));
+  EXPECT_FALSE(Dictionary().hasKeyWithPrefix(""));
+}
+
 TEST(Dictionary, ThousandsOfKeysAreFoundAndMerged) {
   Dictionary left;
   Dictionary right;
