@@ -108,7 +108,7 @@ void TraceFile::write(const SignpostRecord& record) {
     appendNumber(event_, record.signpost.argument.value);
     event_ += '}';
   }
-  if (endEvent(record.at)) ++events_;
+  ++(endEvent(record.at) ? events_ : leftOut_);
 }
 
 void TraceFile::writeCounter(std::string_view name, std::string_view unit, std::int64_t value,
@@ -213,10 +213,7 @@ bool TraceFile::endEvent(std::chrono::nanoseconds at) {
     event_ += R"(,trace","name":"tarnkit.traceFull"})";
     put(event_);
   }
-  if (full_) {
-    ++leftOut_;
-    return false;
-  }
+  if (full_) return false;
   put(event_);
   return true;
 }

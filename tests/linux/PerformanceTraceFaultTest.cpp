@@ -45,6 +45,19 @@ TEST_F(PerformanceTraceFault, AFullFileSaysSoAndTheRestIsCounted) {
                                                  " events: its file is full"));
 }
 
+// What a file adds by itself, such as a thread's name, was never an event of the trace.
+TEST_F(PerformanceTraceFault, OnlyEventsOfTheTraceCountAsLeftOut) {
+  TraceFile file({folder_.path("."), "trace.json", "trace-1", 2, false, 1, 0});  // no room at all
+  ASSERT_FALSE(file.open());
+  file.writeCounter("memory", "bytes", 1, 1s);
+  EXPECT_TRUE(file.isFull());
+  EXPECT_EQ(file.leftOut(), 0U);
+  file.write({{platform::SignpostCategory::TracePoint, "tracePoint", "again"}, 1s, -1ns, 1});
+  EXPECT_EQ(file.leftOut(), 1U);
+  file.writeLost(5, 1s);
+  EXPECT_EQ(file.leftOut(), 6U);
+}
+
 TEST_F(PerformanceTraceFault, AFullBufferLosesWhatComesThenAndTheFileTells) {
   PerformanceTraceLimits limits;
   limits.mostBufferedEvents = 4;
