@@ -169,36 +169,50 @@ class Listener final : public nlohmann::json_sax<Json> {
   std::string failure_;
 };
 
-// Pairs the begins and ends of one thread, in the order of time.
-void pair(std::vector<Event>& open, const Event& event, std::vector<Interval>& intervals) {
-  if (event.phase == 'B') {
-    open.push_back(event);
-    return;
-  }
-  while (!open.empty()) {
-    const bool isSame = !event.hasName || open.back().name == event.name;
-    if (isSame) {
-      const Event begin = open.back();
-      open.pop_back();
-      intervals.push_back({begin.time, event.time - begin.time, begin.name, begin.subsystem});
+// The begins of one thread that have no end yet, innermost last. How many of each name there are is counted, so that an
+// end without its begin costs no search: a trace may hold a million of either.
+class OpenIntervals {
+ public:
+  // Takes the thread's begins and ends in the order of time.
+  void take(const Event& event, std::vector<Interval>& intervals) {
+    if (event.phase == 'B') {
+      begins_.push_back(event);
+      ++named_[event.name];
       return;
     }
-    const bool isOpen =
-        std::any_of(open.begin(), open.end(), [&](const Event& each) { return each.name == event.name; });
-    if (!isOpen) return;  // its begin came before the trace
-    open.pop_back();      // its end never came
+    if (event.hasName) {
+      const auto named = named_.find(event.name);
+      if (named == named_.end() || named->second == 0) return;  // its begin came before the trace
+      while (begins_.back().name != event.name) {
+        pop();  // its end never came
+      }
+    }
+    if (begins_.empty()) return;
+    const Event begin = pop();
+    intervals.push_back({begin.time, event.time - begin.time, begin.name, begin.subsystem});
   }
-}
+
+ private:
+  Event pop() {
+    const Event last = begins_.back();
+    begins_.pop_back();
+    --named_[last.name];
+    return last;
+  }
+
+  std::vector<Event> begins_;
+  std::unordered_map<std::uint32_t, std::size_t> named_;
+};
 
 std::vector<Interval> intervalsOf(std::vector<Event>& events) {
   std::stable_sort(events.begin(), events.end(), [](const Event& a, const Event& b) { return a.time < b.time; });
   std::vector<Interval> intervals;
-  std::map<std::pair<std::int64_t, std::int64_t>, std::vector<Event>> open;
+  std::map<std::pair<std::int64_t, std::int64_t>, OpenIntervals> open;
   for (const Event& event : events) {
     if (event.phase == 'X') {
       intervals.push_back({event.time, event.duration, event.name, event.subsystem});
     } else {
-      pair(open[{event.process, event.thread}], event, intervals);
+      open[{event.process, event.thread}].take(event, intervals);
     }
   }
   std::stable_sort(intervals.begin(), intervals.end(), [](const Interval& a, const Interval& b) {

@@ -193,5 +193,21 @@ TEST(ChromeTrace, PairsAsAStackOfEachThreadDoes) {
   }
 }
 
+// None of them looks through all the begins that are open.
+TEST(ChromeTrace, ManyEndsWithoutTheirBeginsAreQuick) {
+  constexpr int kEach = 200'000;
+  std::string text = R"({"traceEvents":[)";
+  for (int i = 0; i < kEach; ++i) {
+    text += R"({"ph":"B","name":"a","ts":1},)";
+  }
+  for (int i = 0; i < kEach; ++i) {
+    text += R"({"ph":"E","name":"b","ts":2},)";
+  }
+  const ReadTrace read = parseTrace(text + R"({"ph":"E","name":"a","ts":3}]})");
+  EXPECT_EQ(read.failure, "");
+  ASSERT_EQ(read.trace.intervals.size(), 1U);
+  EXPECT_EQ(read.trace.intervals[0].duration, 2000);
+}
+
 }  // namespace
 }  // namespace tarn::trace_analysis
