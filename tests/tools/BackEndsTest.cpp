@@ -150,43 +150,43 @@ TEST_F(BackEnds, TheLineThatSaysMostGetsAnEventThatTwoScriptsWaitFor) {
 }
 
 TEST_F(BackEnds, LanesOfOneScriptKeepNoOrderAmongEachOther) {
-  beside("a", R"({"backend":"rtc","lane":"left","name":"createSession"}
-{"backend":"rtc","lane":"left","name":"flush"}
-{"backend":"rtc","lane":"right","name":"createSession"}
-{"backend":"rtc","lane":"right","name":"flush"}
+  beside("a", R"({"backend":"snare","lane":"left","name":"createSession"}
+{"backend":"snare","lane":"left","name":"flush"}
+{"backend":"snare","lane":"right","name":"createSession"}
+{"backend":"snare","lane":"right","name":"flush"}
 )");
   for (const char* name : {"createSession", "createSession", "flush", "flush"}) {
-    arrives("rtc", name);
+    arrives("snare", name);
   }
   EXPECT_EQ(differences(), Differences{});
 }
 
 TEST_F(BackEnds, ASessionThatTheDetailTellsStaysInItsLane) {
   for (const char* script : {"a", "b"}) {
-    beside(script, std::string(R"({"backend":"rtc","name":"createSession","payload":{"userInfo":{"app":")") + script +
+    beside(script, std::string(R"({"backend":"snare","name":"createSession","payload":{"userInfo":{"app":")") + script +
                        R"("}}}
-{"backend":"rtc","name":"sendMessage","payload":{"n":1}}
-{"backend":"rtc","name":"flush"}
+{"backend":"snare","name":"sendMessage","payload":{"n":1}}
+{"backend":"snare","name":"flush"}
 )");
   }
-  arrives("rtc", "createSession", {{"userInfo", {{"app", "b"}}}}, {{"session", 1}});
-  arrives("rtc", "createSession", {{"userInfo", {{"app", "a"}}}}, {{"session", 2}});
-  arrives("rtc", "sendMessage", {{"n", 1}}, {{"session", 1}});
-  arrives("rtc", "flush", json::object(), {{"session", 1}});
-  arrives("rtc", "sendMessage", {{"n", 1}}, {{"session", 2}});
-  arrives("rtc", "flush", json::object(), {{"session", 2}});
+  arrives("snare", "createSession", {{"userInfo", {{"app", "b"}}}}, {{"session", 1}});
+  arrives("snare", "createSession", {{"userInfo", {{"app", "a"}}}}, {{"session", 2}});
+  arrives("snare", "sendMessage", {{"n", 1}}, {{"session", 1}});
+  arrives("snare", "flush", json::object(), {{"session", 1}});
+  arrives("snare", "sendMessage", {{"n", 1}}, {{"session", 2}});
+  arrives("snare", "flush", json::object(), {{"session", 2}});
   EXPECT_EQ(differences(), Differences{});
   events_[2].detail["session"] = 2;
   EXPECT_NE(differences(), Differences{});
 }
 
 TEST_F(BackEnds, ALineStandsForSoManyEventsAsItSays) {
-  beside("a", R"({"backend":"rtc","name":"sendMessage","times":3}
-{"backend":"rtc","name":"flush"}
+  beside("a", R"({"backend":"snare","name":"sendMessage","times":3}
+{"backend":"snare","name":"flush"}
 )");
   EXPECT_EQ(BackEndComparison(lines_).expected(), 4U);
   for (const char* name : {"sendMessage", "sendMessage", "sendMessage", "flush"}) {
-    arrives("rtc", name);
+    arrives("snare", name);
   }
   EXPECT_EQ(differences(), Differences{});
   events_.erase(events_.begin(), events_.begin() + 2);
@@ -194,9 +194,9 @@ TEST_F(BackEnds, ALineStandsForSoManyEventsAsItSays) {
 }
 
 TEST_F(BackEnds, RefusesLinesThatItCannotRead) {
-  for (const char* line : {"{}", "[1]", "{", R"({"backend":"rtc"})", R"({"name":"x"})", R"({"backend":1,"name":"x"})",
-                           R"({"backend":"rtc","name":"x","times":"often"})",
-                           R"({"backend":"rtc","name":"x","paylod":{}})", R"({"backend":"tally","name":"x"})"}) {
+  for (const char* line : {"{}", "[1]", "{", R"({"backend":"snare"})", R"({"name":"x"})", R"({"backend":1,"name":"x"})",
+                           R"({"backend":"snare","name":"x","times":"often"})",
+                           R"({"backend":"snare","name":"x","paylod":{}})", R"({"backend":"tally","name":"x"})"}) {
     EXPECT_THROW(beside("a", line), std::runtime_error) << line;
   }
 }

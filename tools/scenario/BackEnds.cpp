@@ -49,6 +49,11 @@ std::size_t leavesOf(const json& value) {
   return leaves;
 }
 
+// What has a model of its own.
+bool followsFromScript(const std::string& backend) {
+  return backend == "tally" || backend == "rtc";
+}
+
 // How much a line says: the closer one gets the event that two lanes wait for.
 std::size_t weightOf(const BackEndLine& line) {
   return leavesOf(line.payload) + leavesOf(line.detail) + (line.exact ? 1 : 0);
@@ -80,8 +85,9 @@ std::vector<BackEndLine> backEndLines(const std::string& script) {
     } catch (const json::exception& trouble) {
       throw std::runtime_error(line.origin + ": " + trouble.what());
     }
-    if (lines.back().backend == "tally") {
-      throw std::runtime_error(line.origin + ": analytics events follow from the script itself");
+    if (followsFromScript(lines.back().backend)) {
+      throw std::runtime_error(line.origin + ": the events of " + lines.back().backend +
+                               " follow from the script itself");
     }
   }
   return lines;
@@ -102,7 +108,7 @@ void BackEndComparison::compare(const std::vector<RecordedEvent>& events) {
     }
   }
   for (const RecordedEvent& event : events) {
-    if (event.backend != "tally") {
+    if (!followsFromScript(event.backend)) {
       place(event);
     }
   }

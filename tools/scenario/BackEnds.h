@@ -1,5 +1,5 @@
-// BackEnds: what the back-ends besides the analytics one must receive, as data beside a script (NAME.backends.jsonl),
-// and its comparison with what they did receive.
+// BackEnds: what back-ends must receive that no model works out, as data beside a script (NAME.backends.jsonl), and its
+// comparison with what they did receive. All but the analytics and the real-time-communication reporting one are such.
 //
 // Scripts are played at once, so the events of a back-end are an interleaving of what each script leads to. A lane is
 // what keeps its order in it: a script's lines of one back-end and, where they say so, of one "lane". Each event goes
@@ -37,7 +37,7 @@ class BackEndComparison {
  public:
   explicit BackEndComparison(std::vector<BackEndLine> lines) : lines_(std::move(lines)) {}
 
-  // Once. Leaves the analytics back-end's events alone.
+  // Once. Leaves events that a model works out alone.
   void compare(const std::vector<RecordedEvent>& events);
 
   const std::vector<std::string>& differences() const { return differences_; }

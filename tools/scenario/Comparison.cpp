@@ -1,7 +1,6 @@
 #include "tools/scenario/Comparison.h"
 
 #include <algorithm>
-#include <array>
 #include <cmath>
 #include <set>
 
@@ -9,10 +8,7 @@ namespace tarn::scenario {
 
 namespace {
 
-constexpr const char* kStamp = "tarnreporting_timestamp";
 constexpr const char* kUptimeEvent = "sys.oxbow.tarnkit.tarnreportingclientuptime";
-// Clocks are read at several places.
-constexpr double kClockSlackSeconds = 1;
 
 std::string shown(const RecordedEvent& event) {
   return event.backend + " event " + std::to_string(event.id) + " " + event.name + " " + event.payload.dump();
@@ -97,77 +93,7 @@ std::string Comparison::differenceOf(const ExpectedEvent& expected, const Record
   if (found.detail != json::object()) {
     return "the detail " + found.detail.dump();
   }
-  json payload = found.payload;
-  if (expected.hasFreshStamp && !takeFreshStamp(payload, kStamp)) {
-    return "a stamp outside the time of playing";
-  }
-  if (expected.isSummary) {
-    const std::string fault = takeMachineFacts(payload);
-    if (!fault.empty()) {
-      return fault;
-    }
-  }
-  for (const auto& [key, value] : expected.payload.items()) {
-    if (!payload.contains(key)) {
-      return key + " is missing";
-    }
-    if (payload.at(key) != value) {
-      return key + " is " + payload.at(key).dump() + ", not " + value.dump();
-    }
-  }
-  for (const auto& [key, value] : payload.items()) {
-    if (!expected.payload.contains(key)) {
-      return key + " is extra";
-    }
-  }
-  return {};
-}
-
-bool Comparison::takeFreshStamp(json& payload, const std::string& key) const {
-  const auto stamp = payload.find(key);
-  if (stamp == payload.end() || !stamp->is_number()) {
-    return false;
-  }
-  const auto seconds = stamp->get<double>();
-  payload.erase(stamp);
-  return seconds >= circumstances_.startedAt - kClockSlackSeconds &&
-         seconds <= circumstances_.endedAt + kClockSlackSeconds;
-}
-
-// What a summary says about the machine and the client: of the right kind and possible; then it is taken out.
-std::string Comparison::takeMachineFacts(json& payload) const {
-  const auto take = [&payload](const char* key) {
-    const json value = payload.value(key, json());
-    payload.erase(key);
-    return value;
-  };
-  const json thermal = take("thermal_state");
-  constexpr std::array kThermalStates = {"Nominal", "Fair", "Serious", "Critical", "Unknown"};
-  if (std::find(kThermalStates.begin(), kThermalStates.end(), thermal) == kThermalStates.end()) {
-    return "thermal_state is " + thermal.dump();
-  }
-  if (const json low = take("low_power_enabled"); !low.is_boolean()) {
-    return "low_power_enabled is " + low.dump();
-  }
-  if (const json size = take("vmInfo_phys_footprint_MiB"); !size.is_number_integer() || size < 0 || size > 100000) {
-    return "vmInfo_phys_footprint_MiB is " + size.dump();
-  }
-  for (const char* key : {"load_avg_1_min", "load_avg_5_min", "load_avg_15_min"}) {
-    if (const json load = take(key); !load.is_number() || load < 0) {
-      return std::string(key) + " is " + load.dump();
-    }
-  }
-  if (const json name = take("clientProcessName"); !isClientName(name)) {
-    return "clientProcessName is " + name.dump();
-  }
-  return {};
-}
-
-// The kernel keeps 15 bytes of a process's name, which is one less than this program's.
-bool Comparison::isClientName(const json& name) const {
-  constexpr std::size_t kKernelNameBytes = 15;
-  const std::string& full = circumstances_.clientProcessName;
-  return name == full || name == full.substr(0, kKernelNameBytes);
+  return rules_.differenceOf(expected, found.payload);
 }
 
 // One event for each connection. Which is whose can't be told, so both sides are sorted.
@@ -181,7 +107,7 @@ void Comparison::compareUptimes(const Lane& found) {
   for (const RecordedEvent* event : found) {
     const json uptime = event->payload.value("seconds", json());
     if (event->payload.size() != 2 || !uptime.is_number_integer() ||
-        !isClientName(event->payload.value("processName", json()))) {
+        !rules_.isClientName(event->payload.value("processName", json()))) {
       differences_.push_back("differs: " + shown(*event) + ", expected the client's processName and whole seconds");
       continue;
     }
@@ -193,7 +119,8 @@ void Comparison::compareUptimes(const Lane& found) {
                            std::to_string(seconds.size()) + " uptimes arrived");
     return;
   }
-  const double most = circumstances_.endedAt - circumstances_.startedAt + kClockSlackSeconds;
+  const double most =
+      rules_.circumstances().endedAt - rules_.circumstances().startedAt + PayloadRules::kClockSlackSeconds;
   for (std::size_t index = 0; index < least.size(); ++index) {
     if (seconds[index] < std::floor(least[index]) || seconds[index] > most) {
       differences_.push_back("connections: an uptime of " + std::to_string(seconds[index]) + " s, expected from " +

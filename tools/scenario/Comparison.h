@@ -8,21 +8,15 @@
 #include <vector>
 
 #include "tools/scenario/Model.h"
+#include "tools/scenario/PayloadRules.h"
 #include "tools/scenario/Recorded.h"
 
 namespace tarn::scenario {
 
-// What can only be known by having played the scripts.
-struct Circumstances {
-  double startedAt = 0;  // epoch seconds
-  double endedAt = 0;
-  std::string clientProcessName;  // of every client
-};
-
 class Comparison {
  public:
   Comparison(const std::vector<Expectation>& expectations, const Circumstances& circumstances)
-      : expectations_(expectations), circumstances_(circumstances) {}
+      : expectations_(expectations), rules_(circumstances) {}
 
   // Each adds what differs to differences(). Of the events only those of the tally back-end are looked at.
   void compareEvents(const std::vector<RecordedEvent>& events);
@@ -39,12 +33,9 @@ class Comparison {
   void compareLane(const std::string& application, const std::vector<ExpectedEvent>& expected, const Lane& found);
   void compareUptimes(const Lane& found);
   std::string differenceOf(const ExpectedEvent& expected, const RecordedEvent& found) const;
-  bool takeFreshStamp(json& payload, const std::string& key) const;
-  std::string takeMachineFacts(json& payload) const;
-  bool isClientName(const json& name) const;
 
   const std::vector<Expectation>& expectations_;
-  const Circumstances circumstances_;
+  const PayloadRules rules_;
   std::vector<std::string> differences_;
   std::size_t matched_ = 0;
 };

@@ -33,6 +33,21 @@ std::string dateText(double seconds) {
   return date + "Z";
 }
 
+// Whether the text form of a value is the same here as in the service.
+bool hasKnownText(const json& value) {
+  return !value.is_object() && (!value.is_array() || std::all_of(value.begin(), value.end(), hasKnownText));
+}
+
+std::set<std::string> openTextsOf(const json& message) {
+  std::set<std::string> keys;
+  for (const auto& [key, value] : message.items()) {
+    if (!hasKnownText(value)) {
+      keys.insert(key);
+    }
+  }
+  return keys;
+}
+
 // A script's value as the recorder's JSON has it.
 json recordedForm(const json& value) {
   if (value.is_object() && value.size() == 1 && value.contains("$date")) {
@@ -136,7 +151,7 @@ void Player::start(Connection& connection, std::int64_t id, std::size_t line) {
     return;  // never answered
   }
   session->heldStartLine = line;
-  session->start();
+  session->start(expectation_);
 }
 
 void Player::stop(ModelSession& session) {
@@ -211,6 +226,7 @@ void Player::send(const json& step, std::size_t line) {
   for (ModelSession* session : receivers(step)) {
     session->receive(recordedForm(step.at("message")), categoryOf(step.at("category")), typeOf(step.at("type")), origin,
                      expectation_);
+    session->leaveTextsOpen(openTextsOf(step.at("message")), expectation_);
   }
   reply(line, json());
 }

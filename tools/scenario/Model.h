@@ -24,7 +24,11 @@ struct ExpectedEvent {
   json payload;        // without the stamp when that is made by the service
   std::string origin;  // FILE:LINE, or what else made it
   bool hasFreshStamp = false;
-  bool isSummary = false;  // carries facts about the machine besides
+  bool isSummary = false;      // carries facts about the machine besides
+  bool isMadeAtStop = false;   // by the service
+  bool isMirrored = true;      // in the session's mirror too
+  std::uint16_t category = 0;  // as a mirror tells them
+  std::uint16_t type = 0;
 };
 
 struct ExpectedReply {
@@ -42,6 +46,17 @@ struct ExpectedFile {
   std::size_t made = 0;         // the service's messages in it, besides the markers
 };
 
+// What the real-time-communication reporting service sees of one period of a session.
+struct ExpectedMirror {
+  std::int64_t reporterID = 0;
+  std::uint16_t serviceType = 0;
+  json sessionInfo;  // without the token
+  json userInfo;
+  std::vector<ExpectedEvent> messages;
+  std::set<std::string> openTexts;  // keys with values whose text form isn't worked out here: dates, data, dictionaries
+  bool isEnded = false;             // by a stop
+};
+
 // What one script leads to.
 struct Expectation {
   std::string script;
@@ -56,7 +71,8 @@ struct Expectation {
   // The least seconds that each connection is open.
   std::vector<double> connections;
   std::vector<ExpectedReply> replies;
-  std::vector<ExpectedFile> files;  // in the order of the stops
+  std::vector<ExpectedFile> files;      // in the order of the stops
+  std::vector<ExpectedMirror> mirrors;  // in the order of the starts
 };
 
 // How a script is played.

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <chrono>
+#include <utility>
 
 #include "tools/scenario/Vocabulary.h"
 
@@ -12,12 +13,13 @@ namespace {
 constexpr const char* kStamp = "tarnreporting_timestamp";
 constexpr double kYearSeconds = 365.0 * 86400;
 constexpr std::uint16_t kTestService = 11;
+constexpr std::uint16_t kApiUsageService = 12;
+constexpr std::uint32_t kLagoon = 15;
 constexpr std::uint16_t kSummary = 11;
 
 // The session stops its producers in a fixed order: these two before the one that makes the summary.
 bool isDerivedBeforeTheSummary(const DerivedMessage& message) {
   constexpr std::uint32_t kVolume = 14;
-  constexpr std::uint32_t kLagoon = 15;
   return message.category == kVolume || message.category == kLagoon;
 }
 
@@ -74,8 +76,9 @@ ModelSession ModelSession::successor(std::uint16_t type) const {
   return next;
 }
 
-void ModelSession::start() {
+void ModelSession::start(Expectation& expectation) {
   appendMarker(1);
+  beginMirror(expectation);
   started_ = true;
   forwards_ = true;
 }
@@ -92,6 +95,7 @@ void ModelSession::stop(const std::vector<DerivedMessage>& derived, bool interna
   ExpectedEvent event;
   event.origin = expectation.script + ", the summary of " + application();
   event.isSummary = true;
+  event.isMadeAtStop = true;
   take(summary(), 0x08000001U, kSummary, event, expectation);
   for (const DerivedMessage& message : derived) {
     if (!isDerivedBeforeTheSummary(message)) {
@@ -101,6 +105,10 @@ void ModelSession::stop(const std::vector<DerivedMessage>& derived, bool interna
   if (type_ == kTestService || internalBuild) {
     expectation.files.push_back(
         {reporterID_, application(), serviceText(type_), received, beforeStart_, log_.size() - withMarkers});
+  }
+  if (mirror_) {
+    expectation.mirrors[*mirror_].isEnded = true;
+    mirror_.reset();
   }
   log_.clear();
   beforeStart_ = 0;
@@ -113,6 +121,8 @@ void ModelSession::takeDerived(const DerivedMessage& message, Expectation& expec
   ++expectation.derived;
   ExpectedEvent event;
   event.origin = message.origin;
+  event.isMadeAtStop = true;
+  event.isMirrored = message.category != kLagoon;  // the others are for everyone
   take(message.payload, message.category, message.type, event, expectation);
 }
 
@@ -149,6 +159,10 @@ bool ModelSession::take(json payload, std::uint32_t category, std::uint16_t type
     count(payload);
   }
   forward(payload, category, type, event, expectation);
+  if (isSingle_ && !mirror_) {
+    beginMirror(expectation);  // it is started by its first message
+  }
+  mirror(payload, category, type, std::move(event), expectation);
   return true;
 }
 
@@ -190,6 +204,50 @@ void ModelSession::forward(const json& payload, std::uint32_t category, std::uin
   lane.push_back(event);
   event.name = "sys.oxbow." + serviceText(type_) + "." + what;
   lane.push_back(event);
+}
+
+void ModelSession::beginMirror(Expectation& expectation) {
+  if (type_ == kTestService) {
+    return;
+  }
+  mirror_ = expectation.mirrors.size();
+  ExpectedMirror& mirror = expectation.mirrors.emplace_back();
+  mirror.reporterID = reporterID_;
+  mirror.serviceType = type_;
+  const bool isRealTime = type_ == kApiUsageService;
+  mirror.sessionInfo = {{"clientType", 19},
+                        {"clientVersion", 2.1},
+                        {"sessionID", reporterID_},
+                        {"batchEvent", !isRealTime},
+                        {"containsRealtimeEvents", isRealTime}};
+  json configuration = configuration_;
+  if (isSingle_) {
+    configuration["HostApplicationDisplayID"] = application();
+  }
+  if (const auto host = configuration.find("HostApplicationDisplayID"); host != configuration.end()) {
+    mirror.sessionInfo["clientBundleID"] = *host;
+  }
+  mirror.userInfo = {{"clientName", "sys.oxbow.tarnkit"},
+                     {"TarnReportingSessionID", reporterID_},
+                     {"serviceName", serviceText(type_) + (isSingle_ ? "" : "_session")}};
+  mirror.userInfo.update(configuration);
+}
+
+void ModelSession::mirror(const json& payload, std::uint32_t category, std::uint16_t type, ExpectedEvent event,
+                          Expectation& expectation) const {
+  if (!mirror_ || !event.isMirrored) {
+    return;
+  }
+  event.payload = payload;
+  event.category = static_cast<std::uint16_t>(category & 0xFFFFU);
+  event.type = type;
+  expectation.mirrors[*mirror_].messages.push_back(std::move(event));
+}
+
+void ModelSession::leaveTextsOpen(const std::set<std::string>& keys, Expectation& expectation) const {
+  if (mirror_) {
+    expectation.mirrors[*mirror_].openTexts.insert(keys.begin(), keys.end());
+  }
 }
 
 // As the service reads the counts: both markers are in the log by now.

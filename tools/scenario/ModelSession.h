@@ -3,6 +3,8 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <optional>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -35,11 +37,14 @@ class ModelSession {
 
   // A session of the same ID that takes this one's place.
   ModelSession successor(std::uint16_t type) const;
-  void start();
+  // Begins its mirror too, if it has one.
+  void start(Expectation& expectation);
   // Ends it; what is derived and the summary join the events, and a file the files if the session leaves one.
   void stop(const std::vector<DerivedMessage>& derived, bool internalBuild, Expectation& expectation);
   void receive(const json& message, std::uint32_t category, std::uint16_t type, const std::string& origin,
                Expectation& expectation);
+  // Of these keys the mirror's summary event isn't looked at.
+  void leaveTextsOpen(const std::set<std::string>& keys, Expectation& expectation) const;
 
   std::size_t heldStartLine = 0;  // of the start that waits for its reply; 0: none
 
@@ -57,6 +62,9 @@ class ModelSession {
   void appendMarker(std::uint16_t type);
   void forward(const json& payload, std::uint32_t category, std::uint16_t type, ExpectedEvent event,
                Expectation& expectation) const;
+  void beginMirror(Expectation& expectation);
+  void mirror(const json& payload, std::uint32_t category, std::uint16_t type, ExpectedEvent event,
+              Expectation& expectation) const;
   json summary() const;
 
   std::int64_t reporterID_;
@@ -71,6 +79,7 @@ class ModelSession {
   double activeTime_ = 0;
   std::int64_t activeCount_ = 0;
   std::int64_t overloads_ = 0;
+  std::optional<std::size_t> mirror_;  // its place among the expected ones, while it runs
 };
 
 }  // namespace tarn::scenario

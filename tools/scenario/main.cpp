@@ -15,6 +15,7 @@
 #include "tools/scenario/Account.h"
 #include "tools/scenario/BackEnds.h"
 #include "tools/scenario/Comparison.h"
+#include "tools/scenario/Mirrors.h"
 #include "tools/scenario/Model.h"
 #include "tools/scenario/Recorded.h"
 #include "tools/scenario/ScriptProcess.h"
@@ -125,9 +126,9 @@ std::vector<BackEndLine> backEndLinesOf(const Options& options) {
   return lines;
 }
 
-// The analytics events, with one of each connection's end.
+// Those that follow from the scripts themselves, with one of each connection's end.
 std::size_t expectedEvents(const std::vector<Expectation>& expectations) {
-  std::size_t count = 0;
+  std::size_t count = mirrorEvents(expectations);
   for (const Expectation& expectation : expectations) {
     count += expectation.connections.size();
     for (const auto& [application, events] : expectation.events) {
@@ -182,6 +183,9 @@ int run(const Options& options) {
   SummaryFiles files(options.service.stateDirectory);
   printBackends(events);
   printSessions(expectations, events);
+  MirrorComparison mirrors(expectations, PayloadRules(circumstances), options.internalBuild);
+  mirrors.compare(events);
+  mirrors.print();
   files.print();
 
   Comparison comparison(expectations, circumstances);
@@ -193,10 +197,11 @@ int run(const Options& options) {
   backEnds.compare(events);
   files.compare(expectations, events);
   std::vector<std::string> differences = comparison.differences();
-  for (const auto* more : {&backEnds.differences(), &files.differences()}) {
+  for (const auto* more : {&mirrors.differences(), &backEnds.differences(), &files.differences()}) {
     differences.insert(differences.end(), more->begin(), more->end());
   }
-  return conclude(differences, played, comparison.matched() + backEnds.matched(), events.size(), circumstances);
+  return conclude(differences, played, comparison.matched() + mirrors.matched() + backEnds.matched(), events.size(),
+                  circumstances);
 }
 
 }  // namespace
