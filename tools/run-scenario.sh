@@ -1,8 +1,9 @@
 #!/usr/bin/env bash
 # Plays the example scripts against services of their own and checks what arrived.
 # usage: tools/run-scenario.sh [BUILD_DIR]
-# Two passes: an ordinary device, then an internal build. Each service gets private directories, which go at the end;
-# exit status 0 only when everything arrived and both services ended cleanly.
+# Two passes: an ordinary device, then an internal build. Each service gets private directories, which go at the end,
+# but for what the traced session leaves: that is kept in BUILD_DIR/scenario.
+# Exit status 0 only when everything arrived and both services ended cleanly.
 set -euo pipefail
 
 root=$(cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.." && pwd -P)
@@ -19,7 +20,7 @@ done
 together=(music_player call group_session haptics_engine alarm system_sounds api_usage dictation game_audio test_tones)
 afterwards=(one_shots)
 # The same on the internal build.
-together_internal=(voice_memo)
+together_internal=(voice_memo haptics_leak stuck_sound quiet_alarm faulty_call traced_tones)
 
 private=$(mktemp -d "${TMPDIR:-/tmp}/tarnscenario.XXXXXX")
 service=
@@ -35,17 +36,86 @@ trap cleanup EXIT
 trap 'exit 130' INT
 trap 'exit 143' TERM
 
+# What the internal pass needs before its service starts: the defaults that switch diagnostics on, the probes of the
+# traced session, and the scripts themselves, with the directory filled in.
+prepare_internal() {
+  local directory=$1 suite=sys.oxbow.tarnkit.tarnreporting name
+  "$ctl" --state-dir "$directory/state" defaults write "$suite" ParleyInvalidXyBackOffSeconds 3600
+  "$ctl" --state-dir "$directory/state" defaults write "$suite" enable_gyre true
+  "$ctl" --state-dir "$directory/state" defaults write "$suite" wait_time 1000
+  cat >"$directory/probes.plist" <<'PLIST'
+<?xml version="1.0" encoding="UTF-8"?>
+<plist version="1.0"><array>
+<dict><key>name</key><string>everything</string><key>signpost</key><string>*</string></dict>
+</array></plist>
+PLIST
+  for name in "$root"/examples/internal/*.jsonl; do
+    sed "s|@DIRECTORY@|$directory|g" "$name" >"$directory/${name##*/}"
+  done
+}
+
+# The service asks two tools for its memory log and says of each what came of it. Most machines have neither tool.
+check_memory_log() {
+  local log=$1/log tool
+  printf 'memory log\n'
+  for tool in '/usr/local/bin/restop' '/usr/bin/zonetally -l'; do
+    if ! grep -F "wiredlog: requesting '$tool'" "$log" | cut -c 1-160 ||
+      ! grep -F -e "wiredlog: unable to execute '$tool'" -e "wiredlog: request $tool captured" "$log" | cut -c 1-160
+    then
+      printf 'run-scenario: the memory log lacks %s\n' "$tool" >&2
+      return 1
+    fi
+  done
+}
+
+# The traced session leaves a trace and its measurements.
+check_traces() {
+  local traces=$1/state/DiagnosticLogs/Audio/Traces kept=$build/scenario files=()
+  rm -rf -- "$kept"
+  mkdir -p -- "$kept"
+  mapfile -t files < <(find "$traces" -type f \( -name '*.json' -o -name '*.pdj' \) 2>/dev/null | sort)
+  if ((${#files[@]} != 2)); then
+    printf 'run-scenario: %d files of the traced session, expected a trace and a perf-data file\n' "${#files[@]}" >&2
+    return 1
+  fi
+  cp -- "${files[@]}" "$kept"
+  printf 'traces, kept in %s\n' "$kept"
+  show_trace "$kept"/*.json
+  show_measurements "$kept"/*.pdj
+}
+
+show_trace() {
+  printf '  trace %s: %d bytes\n' "$1" "$(stat -c %s "$1")"
+  grep -m 3 -F '"name":"TarnReportingSession.sendMessage"' "$1" | cut -c 1-160 | sed 's/^/    /' || {
+    printf 'run-scenario: the trace tells of no message\n' >&2
+    return 1
+  }
+}
+
+show_measurements() {
+  printf '  perf data %s: %d bytes\n' "$1" "$(stat -c %s "$1")"
+  grep -F -e '"everything Total"' -e '"everything AVG"' "$1" | cut -c 1-160 | sed 's/^/    /' || {
+    printf 'run-scenario: the perf data has no measurement of the probe\n' >&2
+    return 1
+  }
+}
+
 # pass NAME PROPERTIES SCENARIO_ARGUMENT...: one service and what is played to it. Prints the end of its log when
 # something went wrong.
 pass() {
-  local directory=$private/$1 properties=$2 status=0 ended=0
+  local name=$1 directory=$private/$1 properties=$2 status=0 ended=0
   shift 2
   mkdir -- "$directory"
+  [[ $name != internal ]] || prepare_internal "$directory"
   printf '%s\n' "$properties" >"$directory/device.json"
   "$daemon" --socket "$directory/socket" --state-dir "$directory/state" --device-properties "$directory/device.json" \
     --log-target stderr 2>"$directory/log" &
   service=$!
   "$scenario" --ctl "$ctl" --socket "$directory/socket" --state-dir "$directory/state" "$@" || status=1
+  if [[ $name == internal ]]; then
+    check_memory_log "$directory" || status=1
+    check_traces "$directory" || status=1
+  fi
   kill -TERM "$service"
   wait "$service" || ended=$?
   service=
@@ -65,7 +135,7 @@ for name in "${together[@]}"; do scripts+=("$root/examples/$name.jsonl"); done
 then=()
 for name in "${afterwards[@]}"; do then+=(--then "$root/examples/$name.jsonl"); done
 internal=()
-for name in "${together_internal[@]}"; do internal+=("$root/examples/internal/$name.jsonl"); done
+for name in "${together_internal[@]}"; do internal+=("$private/internal/$name.jsonl"); done
 
 status=0
 pass ordinary '{"InternalBuild": false, "haptics": false}' "${then[@]}" "${scripts[@]}" || status=1
