@@ -141,8 +141,9 @@ TEST_F(RecorderSnareServiceTest, RepliesOnAThreadOfItsOwnWithAFreshIdentifier) {
   for (const Dictionary& reply : replies) {
     EXPECT_EQ(reply.size(), 2U);
     EXPECT_EQ(reply.get(SnareReplyKeys::kSuccess), plist::ValueView(true));
-    identifiers.insert(reply.get(SnareReplyKeys::kSessionIdentifier).asText());
-    EXPECT_TRUE(std::regex_match(*identifiers.begin(), form)) << *identifiers.begin();
+    const std::string identifier = reply.get(SnareReplyKeys::kSessionIdentifier).asText();
+    EXPECT_TRUE(std::regex_match(identifier, form)) << identifier;
+    identifiers.insert(identifier);
   }
   EXPECT_EQ(identifiers.size(), kRequests);
 }
