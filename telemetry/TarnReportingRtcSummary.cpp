@@ -17,6 +17,7 @@ class Table {
     const auto [place, isNew] = places_.try_emplace(key, lists_.size());
     if (isNew) {
       lists_.push_back({key, {}});
+      bytes_ += key.text().size();
     }
     std::string& text = lists_[place->second].text;
     const std::size_t before = text.size();
@@ -26,6 +27,7 @@ class Table {
     plist::appendDescription(text, value);
     bytes_ += text.size() - before;
   }
+  // Of all keys and values.
   std::size_t bytes() const noexcept { return bytes_; }
   plist::Dictionary payload() const {
     std::vector<plist::Dictionary::Entry> entries;

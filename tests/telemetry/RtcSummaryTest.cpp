@@ -181,12 +181,23 @@ TEST_F(RtcSummary, IsCutAtItsLimitBetweenTwoMessages) {
   const auto whole = TarnReportingMakeRtcSummary(AudioServiceType::Generic, messages);
   EXPECT_TRUE(whole.complete);
   EXPECT_EQ(whole.payload["b"].text(), "0,1,2,3");
-  // "0" and "xxxxx" and "0" are seven bytes, ",xxxxx" and ",1" eight more.
-  const auto cut = TarnReportingMakeRtcSummary(AudioServiceType::Generic, messages, 15);
+  // The keys are 28 bytes, "0" and "xxxxx" and "0" seven more, ",xxxxx" and ",1" another eight.
+  const auto cut = TarnReportingMakeRtcSummary(AudioServiceType::Generic, messages, 43);
   EXPECT_FALSE(cut.complete);
   EXPECT_EQ(cut.payload["a"].text(), "xxxxx,xxxxx");
   EXPECT_EQ(cut.payload["b"].text(), "0,1");
-  EXPECT_EQ(TarnReportingMakeRtcSummary(AudioServiceType::Generic, messages, 16).payload["b"].text(), "0,1,2");
+  EXPECT_EQ(TarnReportingMakeRtcSummary(AudioServiceType::Generic, messages, 44).payload["b"].text(), "0,1,2");
+}
+
+TEST_F(RtcSummary, KeysCountTowardsTheLimit) {
+  std::vector<std::shared_ptr<TarnReportingSessionMessage>> messages;
+  for (const char* const key : {"key number 1", "key number 2", "key number 3"}) {
+    messages.push_back(message({{key, ""}}));
+    messages.back()->setIsSessionStarted(true);
+  }
+  const auto cut = TarnReportingMakeRtcSummary(AudioServiceType::Generic, messages, 50);
+  EXPECT_FALSE(cut.complete);
+  EXPECT_EQ(cut.payload.size(), 3U);  // with the event's own
 }
 
 // A slow and obvious model beside a session of random messages.
