@@ -71,17 +71,22 @@ check_memory_log() {
 # The traced session leaves a trace and its measurements.
 check_traces() {
   local traces=$1/state/DiagnosticLogs/Audio/Traces kept=$build/scenario files=()
-  rm -rf -- "$kept"
-  mkdir -p -- "$kept"
   mapfile -t files < <(find "$traces" -type f \( -name '*.json' -o -name '*.pdj' \) 2>/dev/null | sort)
   if ((${#files[@]} != 2)); then
     printf 'run-scenario: %d files of the traced session, expected a trace and a perf-data file\n' "${#files[@]}" >&2
     return 1
   fi
-  cp -- "${files[@]}" "$kept"
-  printf 'traces, kept in %s\n' "$kept"
-  show_trace "$kept"/*.json
-  show_measurements "$kept"/*.pdj
+  printf 'the traced session\n'
+  show_trace "$(keep "$traces"/*.json "$kept/traced_tones.json")" &&
+    show_measurements "$(keep "$traces"/*.pdj "$kept/traced_tones.pdj")"
+}
+
+# keep FILE PLACE: copies, whole even while another run does the same; prints the place.
+keep() {
+  mkdir -p -- "${2%/*}"
+  cp -- "$1" "$2.$$"
+  mv -f -- "$2.$$" "$2"
+  printf '%s\n' "$2"
 }
 
 show_trace() {

@@ -190,7 +190,7 @@ TEST_F(BackEnds, ALineStandsForSoManyEventsAsItSays) {
   }
   EXPECT_EQ(differences(), Differences{});
   events_.erase(events_.begin(), events_.begin() + 2);
-  EXPECT_EQ(differences(), (Differences{"a.backends.jsonl:1: missing: rtc sendMessage {} {}, 2 times"}));
+  EXPECT_EQ(differences(), (Differences{"a.backends.jsonl:1: missing: snare sendMessage {} {}, 2 times"}));
 }
 
 TEST_F(BackEnds, RefusesLinesThatItCannotRead) {

@@ -79,6 +79,12 @@ bool isOfService(const RecordedEvent& event) {
   return event.backend == "rtc";
 }
 
+// Tells sessions of different reporter IDs and types apart.
+std::string keyOf(const json& userInfo) {
+  return textOf(userInfo.value("TarnReportingSessionID", json(0))) + " " +
+         textOf(userInfo.value("serviceName", json("")));
+}
+
 std::string membersThatDiffer(const json& wanted, const json& found) {
   for (const auto& [key, value] : wanted.items()) {
     if (!found.contains(key) || found.at(key) != value) {
@@ -111,15 +117,15 @@ void MirrorComparison::compare(const std::vector<RecordedEvent>& events) {
       sessions_[event.detail.value("session", std::int64_t{0})].push_back(&event);
     }
   }
-  std::map<std::int64_t, std::vector<std::int64_t>> numbers;  // of each reporter ID, in the order of its starts
+  // A session that replaces another on a change of type has a queue of its own, so only those of one type are in order.
+  std::map<std::string, std::vector<std::int64_t>> numbers;
   for (const auto& [number, found] : sessions_) {
-    const json info = found.front()->payload.value("sessionInfo", json::object());
-    numbers[info.value("sessionID", std::int64_t{0})].push_back(number);
+    numbers[keyOf(found.front()->payload.value("userInfo", json::object()))].push_back(number);
   }
   for (const Expectation& expectation : expectations_) {
     for (const ExpectedMirror& mirror : expectation.mirrors) {
       const std::string where = expectation.script + ", the mirror of " + std::to_string(mirror.reporterID) + ": ";
-      std::vector<std::int64_t>& left = numbers[mirror.reporterID];
+      std::vector<std::int64_t>& left = numbers[keyOf(mirror.userInfo)];
       if (left.empty()) {
         differences_.push_back(where + "missing");
         continue;
@@ -128,7 +134,7 @@ void MirrorComparison::compare(const std::vector<RecordedEvent>& events) {
       left.erase(left.begin());
     }
   }
-  for (const auto& [reporterID, left] : numbers) {
+  for (const auto& [key, left] : numbers) {
     for (const std::int64_t number : left) {
       differences_.push_back("extra: " + shown(*sessions_.at(number).front()));
     }

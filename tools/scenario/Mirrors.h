@@ -24,7 +24,7 @@ class MirrorComparison {
       : expectations_(expectations), rules_(std::move(rules)), internalBuild_(internalBuild) {}
 
   // Once. Of the events only those of the service are looked at. The order counts within each of its sessions; the
-  // sessions of one reporter ID must come in the order of its starts.
+  // sessions of one reporter ID and type must come in the order of its starts.
   void compare(const std::vector<RecordedEvent>& events);
   // Shows to stdout each session with its events. After compare().
   void print() const;
