@@ -1,9 +1,9 @@
 #!/usr/bin/env bash
 # Plays the example scripts against services of their own and checks what arrived.
 # usage: tools/run-scenario.sh [BUILD_DIR]
-# Two passes: an ordinary device, then an internal build. Each service gets private directories, which go at the end,
-# but for what the traced session leaves: that is kept in BUILD_DIR/scenario.
-# Exit status 0 only when everything arrived and both services ended cleanly.
+# Three passes: an ordinary device, one with a driver that counts, then an internal build. Each service gets private
+# directories, which go at the end, but for what the traced session leaves: that is kept in BUILD_DIR/scenario.
+# Exit status 0 only when everything arrived and all services ended cleanly.
 set -euo pipefail
 
 root=$(cd -- "$(dirname -- "${BASH_SOURCE[0]}")/.." && pwd -P)
@@ -19,7 +19,9 @@ done
 # Played at once, each by a process of its own; then, alone, what only makes sense when nothing else runs.
 together=(music_player call group_session haptics_engine alarm system_sounds api_usage dictation game_audio test_tones)
 afterwards=(one_shots)
-# The same on the internal build.
+# Alone on a device with a driver that counts.
+drivers=(rumble)
+# At once on the internal build.
 together_internal=(voice_memo haptics_leak stuck_sound quiet_alarm faulty_call traced_tones)
 
 private=$(mktemp -d "${TMPDIR:-/tmp}/tarnscenario.XXXXXX")
@@ -51,6 +53,31 @@ prepare_internal() {
 PLIST
   for name in "$root"/examples/internal/*.jsonl; do
     sed "s|@DIRECTORY@|$directory|g" "$name" >"$directory/${name##*/}"
+  done
+}
+
+# write_channels DIRECTORY ENGINE_ON BUCKET_HITS TRANSITIONS RESIDENCY DUTY_CYCLE: what the driver has counted, replaced
+# whole.
+write_channels() {
+  mkdir -p -- "$1/state/flume"
+  printf '{"driver": "OxbowFoo<0x12>", "group": "Haptics", "subgroup": "Stats", "channels": [
+    {"name": "Engine On", "format": "simple", "unit": "times", "value": %s},
+    {"name": "Latency", "format": "histogram", "unit": "us", "min": 4, "max": 96,
+     "buckets": [[0, 50, 3], [50, 100, %s]]},
+    {"name": "Engine", "format": "state", "unit": "ms", "states": [
+      {"name": "on", "transitions": %s, "residency": %s, "duty_cycle": %s}]}]}\n' "${@:2}" >"$1/channels"
+  mv -- "$1/channels" "$1/state/flume/foo.json"
+}
+
+# Lets the driver count on once the session runs: its script waits 2 s.
+count_on() {
+  local attempt
+  for ((attempt = 0; attempt < 300; ++attempt)); do
+    if grep -q 'active reporting session(s) (reporterID=.*started=1' "$1/log"; then
+      write_channels "$1" 14 9 5 2500 0.25
+      return
+    fi
+    sleep 0.05
   done
 }
 
@@ -108,15 +135,21 @@ show_measurements() {
 # pass NAME PROPERTIES SCENARIO_ARGUMENT...: one service and what is played to it. Prints the end of its log when
 # something went wrong.
 pass() {
-  local name=$1 directory=$private/$1 properties=$2 status=0 ended=0
+  local name=$1 directory=$private/$1 properties=$2 status=0 ended=0 counting=
   shift 2
   mkdir -- "$directory"
   [[ $name != internal ]] || prepare_internal "$directory"
   printf '%s\n' "$properties" >"$directory/device.json"
+  [[ $name != drivers ]] || write_channels "$directory" 10 7 2 1000 0.1
   "$daemon" --socket "$directory/socket" --state-dir "$directory/state" --device-properties "$directory/device.json" \
     --log-target stderr 2>"$directory/log" &
   service=$!
+  if [[ $name == drivers ]]; then
+    count_on "$directory" &
+    counting=$!
+  fi
   "$scenario" --ctl "$ctl" --socket "$directory/socket" --state-dir "$directory/state" "$@" || status=1
+  [[ -z $counting ]] || { wait "$counting" || true; }
   if [[ $name == internal ]]; then
     check_memory_log "$directory" || status=1
     check_traces "$directory" || status=1
@@ -139,10 +172,13 @@ scripts=()
 for name in "${together[@]}"; do scripts+=("$root/examples/$name.jsonl"); done
 then=()
 for name in "${afterwards[@]}"; do then+=(--then "$root/examples/$name.jsonl"); done
+counted=()
+for name in "${drivers[@]}"; do counted+=("$root/examples/drivers/$name.jsonl"); done
 internal=()
 for name in "${together_internal[@]}"; do internal+=("$private/internal/$name.jsonl"); done
 
 status=0
 pass ordinary '{"InternalBuild": false, "haptics": false}' "${then[@]}" "${scripts[@]}" || status=1
+pass drivers '{"InternalBuild": false, "haptics": true}' "${counted[@]}" || status=1
 pass internal '{"InternalBuild": true, "haptics": true}' --internal-build "${internal[@]}" || status=1
 exit "$status"

@@ -32,6 +32,18 @@ void printSummary(const json& payload) {
               text(payload, "summaryServiceName").c_str(), text(payload, "thermal_state").c_str());
 }
 
+constexpr const char* kDriverMessage = "sys.oxbow.tarnkit.Flume.";
+
+// What drivers counted: the members are named for driver, group and channel.
+void printDriver(const json& payload) {
+  for (const auto& [key, value] : payload.items()) {
+    if (key != "audiotag" && key != "HostApplicationDisplayID" && !key.ends_with("timestamp")) {
+      std::printf("      driver   %s = %s\n", key.c_str(),
+                  value.is_string() ? value.get<std::string>().c_str() : value.dump().c_str());
+    }
+  }
+}
+
 // "Speaker, flac 44100 Hz stereo (flac, 2 channels)".
 std::string outputOf(const json& payload) {
   return text(payload, "active_devices") + ", " + text(payload, "session_selected_format") + " (" +
@@ -119,6 +131,8 @@ void printApplication(const std::string& application, std::size_t expected, cons
       std::printf("      derived  %s\n", derivedText(event).c_str());
     } else if (event.name == "sys.oxbow.tarnkit.Session_Generic.Summary") {
       printSummary(event.payload);
+    } else if (event.name.starts_with(kDriverMessage)) {
+      printDriver(event.payload);
     }
   }
 }
