@@ -12,7 +12,7 @@ constexpr std::uint16_t kWisp = 1;
 
 class DriverChannels : public ServiceFixture {
  protected:
-  void writeChannels(const std::string& name, const json& channels) {
+  void writeChannels(const std::string& name, const std::vector<json>& channels) {
     fs::create_directories(folder_);
     const json file = {
         {"driver", "OxbowFoo<0x12>"}, {"group", "Haptics"}, {"subgroup", "Stats"}, {"channels", channels}};
@@ -87,7 +87,7 @@ TEST_F(DriverChannels, ASessionTellsWhatTheDriversCountedWhileItRan) {
                               "count=2,lower=0,upper=100,min=4,max=96,unit=us::50-100:2"}});
   expectEvents("State",
                {{"OxbowFoo_Haptics_Stats_State_Engine", "name:on,transition:3,residency:1500,duty_cycle:0.250000;"}});
-  EXPECT_EQ(logLines(" error "), 0U);
+  EXPECT_EQ(logLines("Z error tarn"), 0U);
 }
 
 TEST_F(DriverChannels, BrokenFilesAreOneComplaintEachAndTheOthersGoOn) {
@@ -103,7 +103,7 @@ TEST_F(DriverChannels, BrokenFilesAreOneComplaintEachAndTheOthersGoOn) {
   expectEvents("Simple", {{"OxbowFoo_Haptics_Stats_Simple_a", 3}});
   EXPECT_EQ(logLines("driver channels: the file broken.json"), 1U);
   EXPECT_EQ(logLines("driver channels: the file bar.json"), 1U);
-  EXPECT_EQ(logLines(" error "), 2U);
+  EXPECT_EQ(logLines("Z error tarn"), 2U);
 }
 
 TEST_F(DriverChannels, FolderOfTheConfigurationCounts) {
@@ -126,7 +126,7 @@ TEST_F(DriverChannels, WithoutChannelsNothingIsSentAndNothingComplainedAbout) {
   }
   ledgerAtRest();
   EXPECT_TRUE(events("sys.oxbow.tarnkit.Flume.*").empty());
-  EXPECT_EQ(logLines(" error "), 0U);
+  EXPECT_EQ(logLines("Z error tarn"), 0U);
 }
 
 }  // namespace
