@@ -1,5 +1,6 @@
 // tarnreportingbench: measures the service and its peers and prints one table. See docs/benchmarks.md.
 #include <CLI/CLI.hpp>
+#include <cmath>
 #include <filesystem>
 #include <iostream>
 #include <string>
@@ -46,7 +47,7 @@ void measure(const Settings& settings, const std::vector<std::string>& only) {
     const double start = nowSeconds();
     std::cerr << "measuring " << figure.name << std::flush;
     figure.measure(settings, table);
-    std::cerr << ", " << static_cast<int>(nowSeconds() - start + 0.5) << " s\n";
+    std::cerr << ", " << std::lround(nowSeconds() - start) << " s\n";
   }
   std::cout << "medians of " << settings.rounds << " rounds; recorded in " << settings.directory << " ("
             << diskOf(settings.directory) << ")\n\n";

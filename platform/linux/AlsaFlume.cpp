@@ -92,8 +92,9 @@ FlumeSamples AlsaFlume::read() {
       sums.insert(*before);  // it may be readable again
     }
     if (const auto before = complaints_.find(path); before == complaints_.end() || before->second != complaint) {
-      hostLog(log_, kDriverCategory, platform::LogLevel::Error, kModule,
-              "driver channels: the substream " + path + " " + complaint);
+      std::string text = "driver channels: the substream ";
+      text.append(path).append(" ").append(complaint);
+      hostLog(log_, kDriverCategory, platform::LogLevel::Error, kModule, text);
     }
     complaints.emplace(path, std::move(complaint));
   }
@@ -115,8 +116,8 @@ std::vector<AlsaFlume::Substream> AlsaFlume::substreams() {
     const std::string inCard = "/" + card;
     for (const std::string& pcm :
          list(inCard, kMostSubstreams, [](auto name) { return isNumbered(name, "pcm", "pc"); })) {
-      for (const std::string& sub :
-           list(inCard + "/" + pcm, kMostSubstreams, [](auto name) { return isNumbered(name, "sub"); })) {
+      for (const std::string& sub : list(std::string(inCard).append("/").append(pcm), kMostSubstreams,
+                                         [](auto name) { return isNumbered(name, "sub"); })) {
         if (found.size() < kMostSubstreams) {
           found.push_back({card, pcm, sub});
         } else {

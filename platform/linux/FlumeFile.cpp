@@ -99,7 +99,7 @@ Complaint takeStates(const plist::ValueView& value, const FlumeFileBounds& bound
     FlumeState state;
     if (!name.isText() || !take(members["transitions"], state.transitions) ||
         !take(members["residency"], state.residency) || !take(members["duty_cycle"], state.dutyCycle)) {
-      return "a state must have \"name\", \"transitions\", \"residency\" and \"duty_cycle\"";
+      return R"(a state must have "name", "transitions", "residency" and "duty_cycle")";
     }
     state.name = std::string(name.text());
     if (!names.insert(state.name).second) {
@@ -116,7 +116,7 @@ Complaint takeNumbers(const plist::Dictionary& members, const FlumeFileBounds& b
       return take(members["value"], channel.value) ? "" : "\"value\" must be a whole number";
     case FlumeFormat::Histogram:
       if (!take(members["min"], channel.minimum) || !take(members["max"], channel.maximum)) {
-        return "\"min\" and \"max\" must be whole numbers";
+        return R"("min" and "max" must be whole numbers)";
       }
       return takeBuckets(members["buckets"], bounds, channel);
     case FlumeFormat::State:
@@ -211,7 +211,7 @@ FlumeFileReading parseFlumeFile(std::string_view text, const FlumeFileBounds& bo
     return {{}, "\"driver\" must be a text"};
   }
   if (!take(members["group"], driver.group) || !take(members["subgroup"], driver.subGroup)) {
-    return {{}, "\"group\" and \"subgroup\" must be texts"};
+    return {{}, R"("group" and "subgroup" must be texts)"};
   }
   if (members["channels"].kind() != plist::Kind::Array) {
     return {{}, "\"channels\" must be a list"};

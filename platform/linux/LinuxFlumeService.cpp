@@ -13,7 +13,6 @@ namespace tarn::linux_host {
 
 using platform::FlumeChannel;
 using platform::FlumeChannelSet;
-using platform::FlumeFormat;
 using platform::FlumeSamples;
 using platform::FlumeState;
 

@@ -13,7 +13,7 @@ std::string differenceOf(const std::string& path, const json& wanted, const json
     return wanted == found ? std::string() : path + " is " + found.dump() + ", not " + wanted.dump();
   }
   for (const auto& [key, value] : wanted.items()) {
-    const std::string inner = path + "." + key;
+    const std::string inner = std::string(path).append(".").append(key);
     if (!found.contains(key)) {
       return inner + " is missing";
     }

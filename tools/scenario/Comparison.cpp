@@ -73,15 +73,15 @@ void Comparison::compareLane(const std::string& application, const std::vector<E
              std::any_of(found.begin() + static_cast<std::ptrdiff_t>(from), found.end(),
                          [&](const auto* one) { return differenceOf(expected[wanted], *one).empty(); });
     };
-    if (got < found.size() && comesLater(got)) {
+    if (got < found.size() && (wanted == expected.size() || comesLater(got))) {
       differences_.push_back(where + "extra: " + shown(*found[got++]));
-    } else if (wanted < expected.size() && got < found.size() && expected[wanted].name == found[got]->name) {
-      differences_.push_back(where + "differs: " + shown(expected[wanted++]) + " was expected, " +
-                             shown(*found[got++]) + " arrived: " + difference);
-    } else if (wanted < expected.size()) {
-      differences_.push_back(where + "missing: " + shown(expected[wanted++]));
+    } else if (got < found.size() && expected[wanted].name == found[got]->name) {
+      std::string text = where + "differs: ";
+      text.append(shown(expected[wanted++])).append(" was expected, ");
+      text.append(shown(*found[got++])).append(" arrived: ").append(difference);
+      differences_.push_back(std::move(text));
     } else {
-      differences_.push_back(where + "extra: " + shown(*found[got++]));
+      differences_.push_back(where + "missing: " + shown(expected[wanted++]));
     }
   }
 }

@@ -162,7 +162,8 @@ void MirrorComparison::compareSession(const std::string& where, const ExpectedMi
     if (difference.empty()) {
       ++matched_;
     } else {
-      differences_.push_back(where + "differs: " + shown(event) + ": " + difference);
+      differences_.push_back(
+          std::string(where).append("differs: ").append(shown(event)).append(": ").append(difference));
     }
   }
 }

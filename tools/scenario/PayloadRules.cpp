@@ -16,7 +16,7 @@ std::string PayloadRules::differenceOf(const ExpectedEvent& expected, json paylo
     return "a stamp outside the time of playing";
   }
   if (expected.isSummary) {
-    const std::string fault = takeMachineFacts(payload);
+    std::string fault = takeMachineFacts(payload);
     if (!fault.empty()) {
       return fault;
     }
@@ -51,7 +51,7 @@ bool PayloadRules::takeFreshStamp(json& payload) const {
 // What a summary says about the machine and the client: of the right kind and possible; then it is taken out.
 std::string PayloadRules::takeMachineFacts(json& payload) const {
   const auto take = [&payload](const char* key) {
-    const json value = payload.value(key, json());
+    json value = payload.value(key, json());
     payload.erase(key);
     return value;
   };

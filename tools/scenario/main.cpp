@@ -80,6 +80,7 @@ std::vector<json> jsonLines(const std::string& path) {
 // Starts all of them, then waits for all. Whether every one succeeded.
 bool play(const std::vector<std::string>& scripts, const Service& service, const std::string& directory) {
   std::vector<ScriptProcess> processes;
+  processes.reserve(scripts.size());
   for (const std::string& script : scripts) {
     processes.emplace_back(service, script, directory);
   }
