@@ -16,8 +16,6 @@ constexpr std::uint32_t kIssuetype = 3;
 constexpr std::uint32_t kNode = 4;
 constexpr std::uint32_t kRtaidclient = 5;
 
-constexpr unsigned kTypeMask = (1U << kWireTypeBits) - 1;
-
 }  // namespace
 
 AudioIssueDetected::AudioIssueDetected(const AudioIssueDetected& other)
@@ -84,7 +82,7 @@ bool AudioIssueDetected::readFrom(WireReader& reader) {
   }
   while (!reader.atEnd() && !reader.failed()) {
     const std::uint64_t tag = reader.readVarint();
-    const auto type = static_cast<unsigned>(tag & kTypeMask);
+    const auto type = static_cast<unsigned>(tag & kWireTypeMask);
     if (reader.failed() || type == static_cast<unsigned>(WireType::GroupEnd)) {
       break;
     }

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <limits>
 #include <mutex>
+#include <optional>
 #include <utility>
 
 #include "diagnostics/TarnReportingDiagnosticDefaults.h"
@@ -161,11 +162,12 @@ void TarnReportingSessionDPWorker::dropGyre(const plist::Dictionary& payload) {
 void TarnReportingSessionDPWorker::handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) {
   const platform::Clock& clock = TarnReportingFacilities().clock;
   const plist::Dictionary& payload = message->message();
+  std::optional<double> now;
   if (interestedInMessage(*message)) {
-    const double now = clock.epochSeconds();  // the wait doesn't count
-    if (meetsConditions(payload, now)) {
+    now = clock.epochSeconds();  // the wait doesn't count
+    if (meetsConditions(payload, *now)) {
       dropGyre(payload);
-      lastMessageTime_ = now;
+      lastMessageTime_ = *now;
       return;
     }
   }
@@ -173,7 +175,8 @@ void TarnReportingSessionDPWorker::handleMessage(const std::shared_ptr<TarnRepor
   log(
       LogLevel::Debug, "Did not drop gyre, right conditions not met: buffer size : %d, time diff : %f, io cycle: %d",
       [&payload] { return bufferFrameSize(payload); },
-      [&clock, this] { return clock.epochSeconds() - lastMessageTime_; }, [&payload] { return ioCycle(payload); });
+      [&clock, &now, this] { return now.value_or(clock.epochSeconds()) - lastMessageTime_; },
+      [&payload] { return ioCycle(payload); });
 }
 
 }  // namespace tarn

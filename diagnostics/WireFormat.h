@@ -26,5 +26,6 @@ enum class WireType : std::uint8_t {
 inline constexpr std::size_t kLongestVarint = 10;
 inline constexpr unsigned kVarintBits = 7;
 inline constexpr unsigned kWireTypeBits = 3;
+inline constexpr unsigned kWireTypeMask = (1U << kWireTypeBits) - 1;
 
 }  // namespace pylonmetrics

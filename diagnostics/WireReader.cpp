@@ -9,7 +9,6 @@ namespace {
 
 constexpr unsigned kMore = 0x80;
 constexpr unsigned kPayload = 0x7f;
-constexpr unsigned kTypeMask = (1U << kWireTypeBits) - 1;
 
 }  // namespace
 
@@ -83,7 +82,7 @@ bool WireReader::skipGroup(std::uint64_t fieldNumber) {
   std::vector<std::uint64_t> open{fieldNumber};
   while (!open.empty()) {
     const std::uint64_t tag = readVarint();
-    const auto type = static_cast<unsigned>(tag & kTypeMask);
+    const auto type = static_cast<unsigned>(tag & kWireTypeMask);
     const std::uint64_t number = tag >> kWireTypeBits;
     if (failed_) {
       return false;
