@@ -13,11 +13,11 @@
 
 namespace tarn::platform {
 
-// An interval between two signposts. Its duration is in ticks of the trace; the time model of the trace makes seconds.
+// An interval between two signposts.
 struct SignpostInterval {
   std::string subsystem;
   std::string name;
-  double durationSeconds = 0;  // as the interval's time model converts it
+  double durationSeconds = 0;  // as the trace's time model converts its ticks
 };
 
 // A probe, as made from a description. Probes nest.
