@@ -2,7 +2,6 @@
 #include <gtest/gtest.h>
 
 #include <cmath>
-#include <cstdio>
 #include <limits>
 #include <random>
 
@@ -14,6 +13,7 @@
 #include "session/TarnReportingSessionWorkerUtility.h"
 #include "tests/derived/DerivationModels.h"
 #include "tests/derived/DerivedMessages.h"
+#include "tests/support/Seeds.h"
 
 namespace tarn {
 namespace {
@@ -54,12 +54,7 @@ void expectSame(const plist::Dictionary& actual, const ModelPayload& expected) {
 
 class DerivationModel : public ::testing::Test {
  protected:
-  DerivationModel() : random_(std::random_device{}()) {
-    platform_.log.setThreshold(LogLevel::Error);
-    seed_ = static_cast<unsigned>(random_());
-    random_.seed(seed_);
-    std::printf("seed %u\n", seed_);
-  }
+  DerivationModel() { platform_.log.setThreshold(LogLevel::Error); }
 
   template <class Values>
   const auto& oneOf(const Values& values) {
@@ -163,22 +158,25 @@ class DerivationModel : public ::testing::Test {
   // Streams until that many messages have gone through; `check` tells how many messages came out.
   template <class Check>
   void run(const std::vector<std::string>& keys, const Check& check) {
-    std::size_t sent = 0;
-    std::size_t derived = 0;
-    while (sent < kMessagesPerRule) {
-      Stream stream = randomStream(keys);
-      sent += stream.messages.size();
-      derived += check(stream);
-      if (HasFatalFailure()) {
-        return;
+    for (const std::uint64_t seed : testSeeds(1)) {
+      SCOPED_TRACE(seedNote(seed));
+      random_.seed(seed);
+      std::size_t sent = 0;
+      std::size_t derived = 0;
+      while (sent < kMessagesPerRule) {
+        Stream stream = randomStream(keys);
+        sent += stream.messages.size();
+        derived += check(stream);
+        if (HasFatalFailure()) {
+          return;
+        }
       }
+      EXPECT_GT(derived, kMessagesPerRule / 100);  // the streams say something
     }
-    EXPECT_GT(derived, kMessagesPerRule / 100);  // the streams say something
   }
 
   FakePlatform platform_;
   std::mt19937 random_;
-  unsigned seed_ = 0;
 };
 
 TEST_F(DerivationModel, CombiningDoesWhatItsModelSays) {

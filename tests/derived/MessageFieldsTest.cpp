@@ -6,6 +6,7 @@
 #include <vector>
 
 #include "derived/TarnReportingMessageFields.h"
+#include "tests/support/Seeds.h"
 
 namespace tarn {
 namespace {
@@ -46,25 +47,26 @@ TEST(MessageFieldReader, ReadsEachPayloadOfOneShapeAnew) {
 }
 
 TEST(MessageFieldReader, ReadsMoreShapesThanItRemembersAsASearchWould) {
-  constexpr std::uint32_t kSeed = 20261121;
-  SCOPED_TRACE("seed " + std::to_string(kSeed));
-  std::mt19937 random(kSeed);
-  const auto below = [&](std::uint32_t limit) { return static_cast<int>(random() % limit); };
-  std::vector<plist::Dictionary> payloads;
-  for (int shape = 0; shape < 1000; ++shape) {
-    plist::Dictionary payload;
-    for (int key = below(8); key >= 0; --key) {
-      static const std::vector<std::string> kNames{"first", "second", "third", "other"};
-      const int which = below(6);
-      payload.set(plist::Key(which < 4 ? kNames[static_cast<std::size_t>(which)] : "key " + std::to_string(below(500))),
-                  key);
+  for (const std::uint64_t seed : testing::testSeeds(1)) {
+    SCOPED_TRACE(testing::seedNote(seed));
+    std::mt19937 random(seed);
+    const auto below = [&](std::uint32_t limit) { return static_cast<int>(random() % limit); };
+    std::vector<plist::Dictionary> payloads;
+    for (int shape = 0; shape < 1000; ++shape) {
+      plist::Dictionary payload;
+      for (int key = below(8); key >= 0; --key) {
+        static const std::vector<std::string> kNames{"first", "second", "third", "other"};
+        const int which = below(6);
+        payload.set(
+            plist::Key(which < 4 ? kNames[static_cast<std::size_t>(which)] : "key " + std::to_string(below(500))), key);
+      }
+      payloads.push_back(payload);
     }
-    payloads.push_back(payload);
-  }
-  TarnReportingMessageFieldReader<Field> reader(kKeys);
-  for (int i = 0; i < 5000; ++i) {
-    const plist::Dictionary& payload = payloads[static_cast<std::size_t>(below(1000))];
-    expectSame(reader.read(payload), Fields(kKeys, payload), plist::description(payload));
+    TarnReportingMessageFieldReader<Field> reader(kKeys);
+    for (int i = 0; i < 5000; ++i) {
+      const plist::Dictionary& payload = payloads[static_cast<std::size_t>(below(1000))];
+      expectSame(reader.read(payload), Fields(kKeys, payload), plist::description(payload));
+    }
   }
 }
 

@@ -8,15 +8,10 @@
 #include "diagnostics/WireReader.h"
 #include "diagnostics/WireWriter.h"
 #include "tests/diagnostics/AudioIssueModels.h"
+#include "tests/support/Seeds.h"
 
 namespace pylonmetrics::testing {
 namespace {
-
-unsigned freshSeed() {
-  const unsigned seed = std::random_device{}();
-  std::printf("seed %u\n", seed);
-  return seed;
-}
 
 std::string written(const AudioIssueDetected& record) {
   WireWriter writer;
@@ -25,41 +20,47 @@ std::string written(const AudioIssueDetected& record) {
 }
 
 TEST(AudioIssueModel, RandomRecordsAreWrittenAsTheModelWritesThemAndReadBack) {
-  RandomIssues random(freshSeed());
-  for (int round = 0; round < 5000; ++round) {
-    const ModelIssue issue = random.issue();
-    const AudioIssueDetected record = recordOf(issue);
-    const std::string bytes = written(record);
-    ASSERT_EQ(bytes, encode(issue));
-    AudioIssueDetected again;
-    WireReader reader(bytes);
-    ASSERT_TRUE(again.readFrom(reader));
-    ASSERT_TRUE(reader.atEnd());
-    ASSERT_TRUE(again == record);
-    ASSERT_EQ(again.hash_value(), record.hash_value());
-    ModelIssue modelled;
-    ASSERT_TRUE(decode(bytes, modelled));
-    ASSERT_EQ(modelled, issue);
+  for (const std::uint64_t seed : tarn::testing::testSeeds(1)) {
+    SCOPED_TRACE(tarn::testing::seedNote(seed));
+    RandomIssues random(seed);
+    for (int round = 0; round < 5000; ++round) {
+      const ModelIssue issue = random.issue();
+      const AudioIssueDetected record = recordOf(issue);
+      const std::string bytes = written(record);
+      ASSERT_EQ(bytes, encode(issue));
+      AudioIssueDetected again;
+      WireReader reader(bytes);
+      ASSERT_TRUE(again.readFrom(reader));
+      ASSERT_TRUE(reader.atEnd());
+      ASSERT_TRUE(again == record);
+      ASSERT_EQ(again.hash_value(), record.hash_value());
+      ModelIssue modelled;
+      ASSERT_TRUE(decode(bytes, modelled));
+      ASSERT_EQ(modelled, issue);
+    }
   }
 }
 
 TEST(AudioIssueModel, RandomInputsAreReadAsTheModelReadsThem) {
-  RandomIssues random(freshSeed());
-  int good = 0;
-  int bad = 0;
-  for (int round = 0; round < 50000; ++round) {
-    const std::string bytes = random.input();
-    ModelIssue expected;
-    const bool isGood = decode(bytes, expected);
-    AudioIssueDetected record;
-    WireReader reader(bytes);
-    ASSERT_EQ(record.readFrom(reader), isGood) << "round " << round;
-    ASSERT_EQ(modelOf(record), expected) << "round " << round;
-    ++(isGood ? good : bad);
+  for (const std::uint64_t seed : tarn::testing::testSeeds(2)) {
+    SCOPED_TRACE(tarn::testing::seedNote(seed));
+    RandomIssues random(seed);
+    int good = 0;
+    int bad = 0;
+    for (int round = 0; round < 50000; ++round) {
+      const std::string bytes = random.input();
+      ModelIssue expected;
+      const bool isGood = decode(bytes, expected);
+      AudioIssueDetected record;
+      WireReader reader(bytes);
+      ASSERT_EQ(record.readFrom(reader), isGood) << "round " << round;
+      ASSERT_EQ(modelOf(record), expected) << "round " << round;
+      ++(isGood ? good : bad);
+    }
+    // Both kinds must have been seen in numbers, or this says little.
+    EXPECT_GT(good, 5000);
+    EXPECT_GT(bad, 5000);
   }
-  // Both kinds must have been seen in numbers, or this says little.
-  EXPECT_GT(good, 5000);
-  EXPECT_GT(bad, 5000);
 }
 
 }  // namespace

@@ -35,7 +35,7 @@ std::string longVarint(std::uint64_t value, std::size_t bytes);
 
 class RandomIssues {
  public:
-  explicit RandomIssues(unsigned seed) : random_(seed) {}
+  explicit RandomIssues(std::uint64_t seed) : random_(seed) {}
 
   ModelIssue issue();
   // Fields in any order, known and unknown, right and wrong, now and then cut off or damaged.

@@ -4,7 +4,6 @@
 
 #include <algorithm>
 #include <chrono>
-#include <cstdio>
 #include <random>
 #include <string>
 #include <vector>
@@ -16,6 +15,7 @@
 #include "platform/linux/LinuxCommandRunner.h"
 #include "tests/diagnostics/AudioIssueModels.h"
 #include "tests/linux/TemporaryFolder.h"
+#include "tests/support/Seeds.h"
 
 namespace pylonmetrics::testing {
 namespace {
@@ -103,46 +103,48 @@ TEST_F(AudioIssueProtoc, DecodesAFullRecord) {
 }
 
 TEST_F(AudioIssueProtoc, RandomRecordsAreDecodedToWhatTheirTextSays) {
-  const unsigned seed = std::random_device{}();
-  std::printf("seed %u\n", seed);
-  RandomIssues random(seed);
-  std::string bytes;
-  std::string text;
-  for (int i = 0; i < kRecords; ++i) {
-    const AudioIssueDetected record = recordOf(random.issue());
-    const std::string one = written(record);
-    bytes += "\x0a" + varint(one.size()) + one;
-    text += textOf(record);
+  for (const std::uint64_t seed : tarn::testing::testSeeds(1)) {
+    SCOPED_TRACE(tarn::testing::seedNote(seed));
+    RandomIssues random(seed);
+    std::string bytes;
+    std::string text;
+    for (int i = 0; i < kRecords; ++i) {
+      const AudioIssueDetected record = recordOf(random.issue());
+      const std::string one = written(record);
+      bytes += "\x0a" + varint(one.size()) + one;
+      text += textOf(record);
+    }
+    const std::vector<std::string> decoded = sortedFields(protocWithSchema("decode", bytes));
+    ASSERT_EQ(decoded.size(), std::size_t{kRecords});
+    EXPECT_EQ(decoded, sortedFields(text));
   }
-  const std::vector<std::string> decoded = sortedFields(protocWithSchema("decode", bytes));
-  ASSERT_EQ(decoded.size(), std::size_t{kRecords});
-  EXPECT_EQ(decoded, sortedFields(text));
 }
 
 TEST_F(AudioIssueProtoc, EncodesTheTextOfRandomRecordsToTheSameBytesWhichAreReadBack) {
-  const unsigned seed = std::random_device{}();
-  std::printf("seed %u\n", seed);
-  RandomIssues random(seed);
-  std::vector<AudioIssueDetected> records;
-  std::string text;
-  for (int i = 0; i < kRecords; ++i) {
-    records.push_back(recordOf(random.issue()));
-    text += textOf(records.back());
+  for (const std::uint64_t seed : tarn::testing::testSeeds(2)) {
+    SCOPED_TRACE(tarn::testing::seedNote(seed));
+    RandomIssues random(seed);
+    std::vector<AudioIssueDetected> records;
+    std::string text;
+    for (int i = 0; i < kRecords; ++i) {
+      records.push_back(recordOf(random.issue()));
+      text += textOf(records.back());
+    }
+    const std::string bytes = protocWithSchema("encode", text);
+    WireReader list(bytes);
+    for (const AudioIssueDetected& record : records) {
+      ASSERT_EQ(list.readVarint(), 0x0aU);
+      std::string one;
+      list.readString(one);
+      ASSERT_FALSE(list.failed());
+      ASSERT_EQ(one, written(record));
+      WireReader reader(one);
+      AudioIssueDetected again;
+      ASSERT_TRUE(again.readFrom(reader));
+      ASSERT_TRUE(again == record);
+    }
+    EXPECT_TRUE(list.atEnd());
   }
-  const std::string bytes = protocWithSchema("encode", text);
-  WireReader list(bytes);
-  for (const AudioIssueDetected& record : records) {
-    ASSERT_EQ(list.readVarint(), 0x0aU);
-    std::string one;
-    list.readString(one);
-    ASSERT_FALSE(list.failed());
-    ASSERT_EQ(one, written(record));
-    WireReader reader(one);
-    AudioIssueDetected again;
-    ASSERT_TRUE(again.readFrom(reader));
-    ASSERT_TRUE(again == record);
-  }
-  EXPECT_TRUE(list.atEnd());
 }
 
 }  // namespace

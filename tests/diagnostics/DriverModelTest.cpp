@@ -8,6 +8,7 @@
 #include "platform/linux/FlumeSource.h"
 #include "platform/linux/LinuxFlumeService.h"
 #include "tests/diagnostics/DriverFixture.h"
+#include "tests/support/Seeds.h"
 
 namespace tarn {
 namespace {
@@ -136,7 +137,7 @@ Expected expectedOf(const FlumeSamples& first, const FlumeSamples& start, const 
 
 class Drawing {
  public:
-  explicit Drawing(unsigned seed) : random_(seed) {}
+  explicit Drawing(std::uint64_t seed) : random_(seed) {}
   int below(int bound) { return std::uniform_int_distribution<int>(0, bound - 1)(random_); }
   template <class Item>
   Item of(const std::vector<Item>& items) {
@@ -217,39 +218,40 @@ std::map<std::string, Number> asMap(const plist::Dictionary& payload) {
 
 // The intake replaces blanks in keys; the keys hold none.
 TEST_F(DriverModel, MessagesAgreeWithTheModelOverRandomChannels) {
-  const unsigned seed = std::random_device()();
-  SCOPED_TRACE("seed " + std::to_string(seed));
-  std::size_t compared = 0;
-  for (unsigned round = 0; round < 1500; ++round) {
-    SCOPED_TRACE("round " + std::to_string(round));
-    Drawing drawing(seed + round);
-    Channels source;
-    linux_host::LinuxFlumeService service({&source});
-    platform_.facilities().flume = &service;
-    const FlumeSamples first = drawing.channels();
-    source.channels = first;
-    const auto session = makeSession();
-    session->start();
-    FlumeSamples start = first;
-    for (int run = 0; run < 2; ++run) {
-      const FlumeSamples stop = drawing.later(start);
-      source.channels = stop;
-      session->stop();
-      const Expected expected = expectedOf(first, start, stop);
-      ASSERT_EQ(asMap<std::int64_t>(received(AudioEventType::Simple)), expected.simple);
-      ASSERT_EQ(asMap<std::string>(received(AudioEventType::Histogram)), expected.histogram);
-      ASSERT_EQ(asMap<std::string>(received(AudioEventType::State)), expected.state);
-      compared += expected.simple.size() + expected.histogram.size() + expected.state.size();
-      script().received.clear();
-      start = drawing.later(stop);
-      source.channels = start;
+  for (const std::uint64_t seed : testSeeds(1)) {
+    SCOPED_TRACE(seedNote(seed));
+    std::size_t compared = 0;
+    for (unsigned round = 0; round < 1500; ++round) {
+      SCOPED_TRACE("round " + std::to_string(round));
+      Drawing drawing(seed + round);
+      Channels source;
+      linux_host::LinuxFlumeService service({&source});
+      platform_.facilities().flume = &service;
+      const FlumeSamples first = drawing.channels();
+      source.channels = first;
+      const auto session = makeSession();
       session->start();
+      FlumeSamples start = first;
+      for (int run = 0; run < 2; ++run) {
+        const FlumeSamples stop = drawing.later(start);
+        source.channels = stop;
+        session->stop();
+        const Expected expected = expectedOf(first, start, stop);
+        ASSERT_EQ(asMap<std::int64_t>(received(AudioEventType::Simple)), expected.simple);
+        ASSERT_EQ(asMap<std::string>(received(AudioEventType::Histogram)), expected.histogram);
+        ASSERT_EQ(asMap<std::string>(received(AudioEventType::State)), expected.state);
+        compared += expected.simple.size() + expected.histogram.size() + expected.state.size();
+        script().received.clear();
+        start = drawing.later(stop);
+        source.channels = start;
+        session->start();
+      }
+      TarnReportingDriverUtility::reset();
+      platform_.log.clear();
     }
-    TarnReportingDriverUtility::reset();
-    platform_.log.clear();
+    platform_.facilities().flume = &platform_.flume;
+    EXPECT_GT(compared, 1000U);
   }
-  platform_.facilities().flume = &platform_.flume;
-  EXPECT_GT(compared, 1000U);
 }
 
 }  // namespace

@@ -1,11 +1,11 @@
 // Random streams of messages over random sessions and clocks, through the Snare worker and through a slow and obvious
 // model of what it must ask the capture service for.
-#include <cstdio>
 #include <map>
 #include <random>
 #include <tuple>
 
 #include "tests/diagnostics/SnareFixture.h"
+#include "tests/support/Seeds.h"
 
 namespace tarn {
 namespace {
@@ -110,12 +110,16 @@ std::string lineOf(const FakeSnareService::Call& call) {
          std::to_string(static_cast<int>(call.request.durationSeconds));
 }
 
+// One round of a test, in a world of its own.
 class SnareModel : public SnareFixture {
- protected:
-  SnareModel() : seed_(std::random_device{}()), random_(seed_) {
-    platform_.log.setThreshold(LogLevel::Error);
-    std::printf("seed %u\n", seed_);
-  }
+ public:
+  explicit SnareModel(std::uint64_t seed) : random_(seed) { platform_.log.setThreshold(LogLevel::Error); }
+  void TestBody() override {}
+
+  void asksForWhatTheModelAsksFor();
+  void firesByTheRuleWhateverTheThresholds();
+
+ private:
   int below(int bound) { return static_cast<int>(random_() % static_cast<unsigned>(bound)); }
   bool chance(int percent) { return below(100) < percent; }
 
@@ -143,7 +147,6 @@ class SnareModel : public SnareFixture {
     platform_.clock.setEpochSeconds(now() + kSteps[below(10)]);
   }
 
-  const unsigned seed_;
   std::mt19937 random_;
   const double start_ = now();
 };
@@ -159,7 +162,7 @@ class SnareWorld {
   std::vector<Pair> pairs;
 };
 
-TEST_F(SnareModel, AsksForWhatTheModelAsksFor) {
+void SnareModel::asksForWhatTheModelAsksFor() {
   static constexpr std::uint16_t kTypes[]{3, 4, 4, 4, 11, 13};
   SnareWorld world;
   for (int step = 0; step < 60'000; ++step) {
@@ -267,7 +270,7 @@ class RuleModel {
   bool firedBefore_ = false;
 };
 
-TEST_F(SnareModel, FiresByTheRuleWhateverTheThresholds) {
+void SnareModel::firesByTheRuleWhateverTheThresholds() {
   const Session session = makeSession();
   std::size_t fired = 0;
   for (int round = 0; round < 300; ++round) {
@@ -298,6 +301,20 @@ TEST_F(SnareModel, FiresByTheRuleWhateverTheThresholds) {
     fired += expected.size();
   }
   EXPECT_GT(fired, 1000U);
+}
+
+TEST(SnareModel, AsksForWhatTheModelAsksFor) {
+  for (const std::uint64_t seed : testSeeds(1)) {
+    SCOPED_TRACE(seedNote(seed));
+    SnareModel(seed).asksForWhatTheModelAsksFor();
+  }
+}
+
+TEST(SnareModel, FiresByTheRuleWhateverTheThresholds) {
+  for (const std::uint64_t seed : testSeeds(2)) {
+    SCOPED_TRACE(seedNote(seed));
+    SnareModel(seed).firesByTheRuleWhateverTheThresholds();
+  }
 }
 
 }  // namespace

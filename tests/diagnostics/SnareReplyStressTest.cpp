@@ -1,6 +1,5 @@
 // The worker on the recorder's capture service, whose own thread replies while sessions stop and go. For the
 // sanitizers.
-#include <cstdio>
 #include <random>
 
 #include "platform/linux/LinuxRandomSource.h"
@@ -8,6 +7,7 @@
 #include "platform/recorder/RecorderSnareService.h"
 #include "tests/diagnostics/SnareFixture.h"
 #include "tests/recorder/RecorderFixture.h"
+#include "tests/support/Seeds.h"
 
 namespace tarn {
 namespace {
@@ -16,8 +16,7 @@ using namespace testing;
 
 class SnareReplyStress : public SnareFixture {
  protected:
-  SnareReplyStress() : seed_(std::random_device{}()), random_(seed_) {
-    std::printf("seed %u\n", seed_);
+  SnareReplyStress() {
     platform_.log.setThreshold(LogLevel::Info);  // handlers log while the queue does
     options_.file = directory_.path() / "recorder.sqlite3";
     recorder_ = std::make_unique<recorder::Recorder>(options_, recorderLog_, platform_.clock);
@@ -26,13 +25,10 @@ class SnareReplyStress : public SnareFixture {
         std::make_unique<recorder::RecorderSnareService>(*recorder_, platform_.clock, randomSource_, std::nullopt);
     platform_.facilities().snare = service_.get();
   }
-  unsigned below(unsigned bound) { return static_cast<unsigned>(random_() % bound); }
   std::string count(const std::string& name) {
     return recorder::askOne(options_.file, "SELECT count(*) FROM events WHERE name = '" + name + "'");
   }
 
-  const unsigned seed_;
-  std::mt19937 random_;
   recorder::TemporaryDirectory directory_;
   recorder::RecorderOptions options_;
   RecordingLog recorderLog_;
@@ -43,24 +39,31 @@ class SnareReplyStress : public SnareFixture {
 
 TEST_F(SnareReplyStress, RepliesMeetStopsRestartsAndTheEndOfSessions) {
   constexpr int kSessions = 400;
-  for (int i = 0; i < kSessions; ++i) {
-    Session session = startedSession(AudioServiceType::Alarms, i + 2);
-    sendLowRms(session, 3);
-    session->sendMessage(hapticLeak(2 * i));
-    session->sendMessage(hapticLeak(2 * i + 1));
-    session->sendMessage(stuckSound(i));
-    platform_.clock.advance(std::chrono::seconds(15));
-    for (unsigned stops = below(3); stops > 0; --stops) {
-      session->stop();
-      session->start();
+  int sessions = 0;
+  for (const std::uint64_t seed : testSeeds(1)) {
+    std::mt19937 random(seed);
+    const int first = sessions;
+    sessions += kSessions;
+    for (int i = first; i < sessions; ++i) {
+      Session session = startedSession(AudioServiceType::Alarms, i + 2);
+      sendLowRms(session, 3);
+      session->sendMessage(hapticLeak(2 * i));
+      session->sendMessage(hapticLeak(2 * i + 1));
+      session->sendMessage(stuckSound(i));
+      platform_.clock.advance(std::chrono::seconds(15));
+      for (auto stops = random() % 3; stops > 0; --stops) {
+        session->stop();
+        session->start();
+      }
+      if (random() % 20 == 0) TarnReportingSnareProcessState::reset();
+      session.reset();  // released without a stop
     }
-    if (below(20) == 0) TarnReportingSnareProcessState::reset();
-    session.reset();  // released without a stop
+    ASSERT_TRUE(recorder_->flush(recorder::kPatience));  // its queue takes one round
   }
   service_.reset();  // waits for the handler that runs; what it didn't come to is dropped
   ASSERT_TRUE(recorder_->flush(recorder::kPatience));
-  EXPECT_EQ(count("startSession"), std::to_string(kSessions));
-  EXPECT_EQ(count("requestSnapshot"), std::to_string(2 * kSessions));
+  EXPECT_EQ(count("startSession"), std::to_string(sessions));
+  EXPECT_EQ(count("requestSnapshot"), std::to_string(2 * sessions));
   EXPECT_FALSE(platform_.log.contains("not accepted"));
 }
 

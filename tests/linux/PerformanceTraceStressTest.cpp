@@ -1,12 +1,12 @@
 // Signposts from many threads while traces start, stop and are let go of; run under ThreadSanitizer as well.
 #include <atomic>
-#include <iostream>
 #include <random>
 
 #include "platform/linux/LinuxClock.h"
 #include "service/TarnReportingPlatform.h"
 #include "service/TarnReportingSignpost.h"
 #include "tests/linux/PerformanceTraceFixture.h"
+#include "tests/support/Seeds.h"
 
 namespace tarn::linux_host {
 namespace {
@@ -49,43 +49,44 @@ class PerformanceTraceStress : public PerformanceTraceFixture {
 };
 
 TEST_F(PerformanceTraceStress, TracesComeAndGoWhileThreadsSpeak) {
-  const auto seed = std::random_device()();
-  std::cout << "seed " << seed << '\n';
-  std::mt19937 random(seed);
-  PerformanceTraceLimits limits;
-  limits.mostBufferedEvents = 512;
-  limits.mostBytes = 64 * 1024;
-  limits.drainInterval = 1ms;
-  make(limits);
-  log_.setThreshold(platform::LogLevel::Error);
-  const Speakers speakers(signposts_);
-  int completed = 0;
-  for (int i = 0; i < kTraces; ++i) {
-    Trace trace = makeTrace(i % 2 == 0 ? 2 : 3);
-    trace.session->startTrace();
-    switch (random() % 4) {
-      case 0:
-        break;  // let go of right behind the start
-      case 1:
-        EXPECT_TRUE(trace.delegate->waitFor("start"));
-        break;
-      case 2:
-        trace.session->stopTrace();
-        break;  // let go of right behind the stop
-      default: {
-        EXPECT_TRUE(trace.delegate->waitFor("start"));
-        const std::string text = finish(trace);
-        EXPECT_TRUE(Json::accept(text));
-        std::filesystem::remove(trace.delegate->location());
-        ++completed;
+  for (const std::uint64_t seed : tarn::testing::testSeeds(1)) {
+    SCOPED_TRACE(tarn::testing::seedNote(seed));
+    std::mt19937 random(seed);
+    PerformanceTraceLimits limits;
+    limits.mostBufferedEvents = 512;
+    limits.mostBytes = 64 * 1024;
+    limits.drainInterval = 1ms;
+    make(limits);
+    log_.setThreshold(platform::LogLevel::Error);
+    const Speakers speakers(signposts_);
+    int completed = 0;
+    for (int i = 0; i < kTraces; ++i) {
+      Trace trace = makeTrace(i % 2 == 0 ? 2 : 3);
+      trace.session->startTrace();
+      switch (random() % 4) {
+        case 0:
+          break;  // let go of right behind the start
+        case 1:
+          EXPECT_TRUE(trace.delegate->waitFor("start"));
+          break;
+        case 2:
+          trace.session->stopTrace();
+          break;  // let go of right behind the stop
+        default: {
+          EXPECT_TRUE(trace.delegate->waitFor("start"));
+          const std::string text = finish(trace);
+          EXPECT_TRUE(Json::accept(text));
+          std::filesystem::remove(trace.delegate->location());
+          ++completed;
+        }
       }
     }
-  }
-  EXPECT_GT(completed, 0);
-  service_->shutdown();
-  EXPECT_FALSE(signposts_.isRecording());
-  for (const std::string& name : files()) {
-    EXPECT_TRUE(name.ends_with(".json")) << name;
+    EXPECT_GT(completed, 0);
+    service_->shutdown();
+    EXPECT_FALSE(signposts_.isRecording());
+    for (const std::string& name : files()) {
+      EXPECT_TRUE(name.ends_with(".json")) << name;
+    }
   }
 }
 

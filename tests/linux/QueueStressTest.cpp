@@ -10,6 +10,7 @@
 #include "platform/linux/LinuxWorkQueues.h"
 #include "tests/linux/Eventually.h"
 #include "tests/linux/RunningLoop.h"
+#include "tests/support/Seeds.h"
 
 namespace tarn::linux_host {
 namespace {
@@ -59,31 +60,32 @@ TEST(QueueStress, APooledQueueKeepsEveryThreadsOrder) {
 }
 
 void expectDelaysUnderStress(platform::WorkQueue& queue, const platform::Clock& clock) {
-  const auto seed = std::random_device{}();
-  SCOPED_TRACE("seed " + std::to_string(seed));
-  std::atomic<int> ran{0};
-  std::atomic<int> early{0};
-  std::vector<std::thread> threads;
-  for (unsigned thread = 0; thread < kThreads; ++thread) {
-    threads.emplace_back([&, thread] {
-      std::mt19937 random(seed + thread);
-      for (int piece = 0; piece < 300; ++piece) {
-        const std::chrono::nanoseconds delay(random() % 20000000);
-        const auto moment = clock.monotonic() + delay;
-        queue.asyncAfter(delay, [&, moment] {
-          if (clock.monotonic() < moment) {
-            ++early;
-          }
-          ++ran;
-        });
-      }
-    });
+  for (const std::uint64_t seed : tarn::testing::testSeeds(1)) {
+    SCOPED_TRACE(tarn::testing::seedNote(seed));
+    std::atomic<int> ran{0};
+    std::atomic<int> early{0};
+    std::vector<std::thread> threads;
+    for (unsigned thread = 0; thread < kThreads; ++thread) {
+      threads.emplace_back([&, thread] {
+        std::mt19937 random(seed + thread);
+        for (int piece = 0; piece < 300; ++piece) {
+          const std::chrono::nanoseconds delay(random() % 20000000);
+          const auto moment = clock.monotonic() + delay;
+          queue.asyncAfter(delay, [&, moment] {
+            if (clock.monotonic() < moment) {
+              ++early;
+            }
+            ++ran;
+          });
+        }
+      });
+    }
+    for (auto& thread : threads) {
+      thread.join();
+    }
+    EXPECT_TRUE(eventually([&] { return ran == kThreads * 300; }));
+    EXPECT_EQ(early, 0);
   }
-  for (auto& thread : threads) {
-    thread.join();
-  }
-  EXPECT_TRUE(eventually([&] { return ran == kThreads * 300; }));
-  EXPECT_EQ(early, 0);
 }
 
 TEST(QueueStress, TheServerQueueRunsDelayedWorkNeverEarlyAndAllOfIt) {
@@ -147,12 +149,15 @@ TEST(QueueStress, ASleepingPoolMissesNoWakeUp) {
   LinuxWorkQueues queues(running.clock, running.loop.queue());
   const auto queue = queues.makeSerialQueue("stress", platform::QualityOfService::Utility);
   const auto delayed = queues.makeSerialQueue("delayed", platform::QualityOfService::Utility);
-  std::mt19937 random(7);
-  for (int round = 0; round < 1000; ++round) {
-    std::atomic<int> ran{0};
-    queue->async([&ran] { ++ran; });
-    delayed->asyncAfter(std::chrono::nanoseconds(random() % 1'000'000), [&ran] { ++ran; });
-    ASSERT_TRUE(eventually([&] { return ran == 2; })) << round;
+  for (const std::uint64_t seed : tarn::testing::testSeeds(2)) {
+    SCOPED_TRACE(tarn::testing::seedNote(seed));
+    std::mt19937 random(seed);
+    for (int round = 0; round < 1000; ++round) {
+      std::atomic<int> ran{0};
+      queue->async([&ran] { ++ran; });
+      delayed->asyncAfter(std::chrono::nanoseconds(random() % 1'000'000), [&ran] { ++ran; });
+      ASSERT_TRUE(eventually([&] { return ran == 2; })) << round;
+    }
   }
 }
 

@@ -9,6 +9,7 @@
 
 #include "plist/Dictionary.h"
 #include "plist/Value.h"
+#include "tests/support/Seeds.h"
 
 namespace tarn::plist {
 namespace {
@@ -75,44 +76,45 @@ void expectSame(const Dictionary& dictionary, const Model& model) {
 }
 
 TEST(DictionaryModel, RandomChangesLeaveWhatTheModelHolds) {
-  const unsigned seed = std::random_device{}();
-  SCOPED_TRACE("seed " + std::to_string(seed));
-  std::mt19937 random(seed);
-  for (int round = 0; round < 60; ++round) {
-    Dictionary dictionary;
-    Model model;
-    std::vector<std::pair<Dictionary, Model>> copies;
-    for (int step = 0; step < 120; ++step) {
-      const std::string key = "key" + std::to_string(random() % 24);
-      switch (random() % 6) {
-        case 0:
-          dictionary.remove(Key(key));
-          if (const auto found = find(model, key); found != model.end()) {
-            model.erase(found);
-          }
-          break;
-        case 1:
-          copies.emplace_back(dictionary, model);
-          break;
-        case 2:
-          if (!copies.empty()) {
-            const auto& [other, otherModel] = copies[random() % copies.size()];
-            dictionary.merge(other);
-            for (const auto& [name, value] : otherModel) {
-              set(model, name, value);
+  for (const std::uint64_t seed : tarn::testing::testSeeds(1)) {
+    SCOPED_TRACE(tarn::testing::seedNote(seed));
+    std::mt19937 random(seed);
+    for (int round = 0; round < 60; ++round) {
+      Dictionary dictionary;
+      Model model;
+      std::vector<std::pair<Dictionary, Model>> copies;
+      for (int step = 0; step < 120; ++step) {
+        const std::string key = "key" + std::to_string(random() % 24);
+        switch (random() % 6) {
+          case 0:
+            dictionary.remove(Key(key));
+            if (const auto found = find(model, key); found != model.end()) {
+              model.erase(found);
             }
+            break;
+          case 1:
+            copies.emplace_back(dictionary, model);
+            break;
+          case 2:
+            if (!copies.empty()) {
+              const auto& [other, otherModel] = copies[random() % copies.size()];
+              dictionary.merge(other);
+              for (const auto& [name, value] : otherModel) {
+                set(model, name, value);
+              }
+            }
+            break;
+          default: {
+            const Value value = randomValue(random, 2);
+            dictionary.set(Key(key), value);
+            set(model, key, value);
           }
-          break;
-        default: {
-          const Value value = randomValue(random, 2);
-          dictionary.set(Key(key), value);
-          set(model, key, value);
         }
       }
-    }
-    expectSame(dictionary, model);
-    for (const auto& [copy, copyModel] : copies) {
-      expectSame(copy, copyModel);
+      expectSame(dictionary, model);
+      for (const auto& [copy, copyModel] : copies) {
+        expectSame(copy, copyModel);
+      }
     }
   }
 }

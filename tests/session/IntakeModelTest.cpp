@@ -7,6 +7,7 @@
 #include "plist/Value.h"
 #include "session/TarnReportingSessionKeys.h"
 #include "tests/session/SessionFixture.h"
+#include "tests/support/Seeds.h"
 
 namespace tarn {
 namespace {
@@ -157,63 +158,66 @@ class IntakeModel : public SessionFixture {
 };
 
 TEST_F(IntakeModel, RandomStreamsAreLoggedMarkedAndMergedAsTheModelSays) {
-  const unsigned seed = std::random_device{}();
-  std::printf("seed %u\n", seed);
-  std::mt19937 random(seed);
-  useWorkers<StopSender>();
-  Model model;
-  const auto session = makeSession();
-  const std::vector<AudioEventCategory> categories{AudioEventCategory::Playback, AudioEventCategory::Error,
-                                                   AudioEventCategory::Setup};
-  const std::vector<AudioEventType> types{AudioEventType::Start, AudioEventType::Stop, AudioEventType::Error};
-  const auto sendOne = [&] {
-    const auto wire = randomWire(random);
-    plist::Dictionary payload;
-    for (const auto& [key, value] : wire) {
-      payload.set(plist::Key(key), value);
+  const double beginning = now();
+  for (const std::uint64_t seed : testing::testSeeds(1)) {
+    SCOPED_TRACE(testing::seedNote(seed));
+    platform_.clock.setEpochSeconds(beginning);
+    std::mt19937 random(seed);
+    useWorkers<StopSender>();
+    Model model;
+    const auto session = makeSession();
+    const std::vector<AudioEventCategory> categories{AudioEventCategory::Playback, AudioEventCategory::Error,
+                                                     AudioEventCategory::Setup};
+    const std::vector<AudioEventType> types{AudioEventType::Start, AudioEventType::Stop, AudioEventType::Error};
+    const auto sendOne = [&] {
+      const auto wire = randomWire(random);
+      plist::Dictionary payload;
+      for (const auto& [key, value] : wire) {
+        payload.set(plist::Key(key), value);
+      }
+      const AudioEventCategory category = categories[random() % categories.size()];
+      const AudioEventType type = types[random() % types.size()];
+      const auto [expected, redundant] = model.take(wire, category, type, now());
+      const auto record = message(payload, category, type);
+      session->sendMessage(record);
+      ASSERT_EQ(payloadOf(record->message()), expected);
+      ASSERT_EQ(record->isRedundant(), redundant);
+    };
+    const auto takeMarker = [&] {
+      const auto& marker = *session->messages().back();
+      model.log.push_back({payloadOf(marker.message()), marker.category(), marker.type()});
+    };
+    StopSender::atStop = [&] {
+      // The stop marker went in before the sort; from here on the look-up sees the sorted log.
+      for (int i = 0; i < 3; ++i) {
+        sendOne();
+      }
+    };
+    for (int period = 0; period < 60; ++period) {
+      session->start();
+      takeMarker();
+      for (int step = 0; step < 60; ++step) {
+        ASSERT_NO_FATAL_FAILURE(sendOne());
+        platform_.advance(std::chrono::milliseconds(random() % 1500));
+      }
+      plist::Dictionary stopMarker{{"method", "stop"},
+                                   {"messages_at_stop", session->messages().size()},
+                                   {"unique_messages_at_stop", session->messages().size()},
+                                   {"reporterid", 7},
+                                   {"running_at_stop", "YES"},
+                                   {"invalid_timestamp", "nil"},
+                                   {"tarnreporting_timestamp", now()},
+                                   {"audiotag", "SetupStop"}};
+      model.log.push_back({payloadOf(stopMarker), AudioEventCategory::Setup, AudioEventType::Stop});
+      model.sort();
+      EXPECT_EQ(session->totalMessageCount(), model.total);
+      session->stop();
+      model.log.clear();
+      model.total = 0;
+      EXPECT_EQ(payloadOf(session->previousValues().dictionary()), model.previous);
     }
-    const AudioEventCategory category = categories[random() % categories.size()];
-    const AudioEventType type = types[random() % types.size()];
-    const auto [expected, redundant] = model.take(wire, category, type, now());
-    const auto record = message(payload, category, type);
-    session->sendMessage(record);
-    ASSERT_EQ(payloadOf(record->message()), expected);
-    ASSERT_EQ(record->isRedundant(), redundant);
-  };
-  const auto takeMarker = [&] {
-    const auto& marker = *session->messages().back();
-    model.log.push_back({payloadOf(marker.message()), marker.category(), marker.type()});
-  };
-  StopSender::atStop = [&] {
-    // The stop marker went in before the sort; from here on the look-up sees the sorted log.
-    for (int i = 0; i < 3; ++i) {
-      sendOne();
-    }
-  };
-  for (int period = 0; period < 60; ++period) {
-    session->start();
-    takeMarker();
-    for (int step = 0; step < 60; ++step) {
-      ASSERT_NO_FATAL_FAILURE(sendOne());
-      platform_.advance(std::chrono::milliseconds(random() % 1500));
-    }
-    plist::Dictionary stopMarker{{"method", "stop"},
-                                 {"messages_at_stop", session->messages().size()},
-                                 {"unique_messages_at_stop", session->messages().size()},
-                                 {"reporterid", 7},
-                                 {"running_at_stop", "YES"},
-                                 {"invalid_timestamp", "nil"},
-                                 {"tarnreporting_timestamp", now()},
-                                 {"audiotag", "SetupStop"}};
-    model.log.push_back({payloadOf(stopMarker), AudioEventCategory::Setup, AudioEventType::Stop});
-    model.sort();
-    EXPECT_EQ(session->totalMessageCount(), model.total);
-    session->stop();
-    model.log.clear();
-    model.total = 0;
-    EXPECT_EQ(payloadOf(session->previousValues().dictionary()), model.previous);
+    StopSender::atStop = nullptr;
   }
-  StopSender::atStop = nullptr;
 }
 
 }  // namespace

@@ -1,4 +1,5 @@
 #include "session/TarnReportingSessionPreviousValues.h"
+#include "tests/support/Seeds.h"
 
 #include <gtest/gtest.h>
 
@@ -44,22 +45,23 @@ TEST(TarnReportingSessionPreviousValues, AnotherSessionsValuesWinOverOwnOnes) {
 }
 
 TEST(TarnReportingSessionPreviousValues, ManyShapesMergeAsOneByOne) {
-  const unsigned seed = std::random_device{}();
-  SCOPED_TRACE("seed " + std::to_string(seed));
-  std::mt19937 random(seed);
-  TarnReportingSessionPreviousValues values;
-  plist::Dictionary model;
-  for (int i = 0; i < 5000; ++i) {
-    plist::Dictionary payload;
-    for (std::size_t keys = random() % 4; keys > 0; --keys) {
-      payload.set(plist::Key("key" + std::to_string(random() % 12)), i);
+  for (const std::uint64_t seed : testing::testSeeds(1)) {
+    SCOPED_TRACE(testing::seedNote(seed));
+    std::mt19937 random(seed);
+    TarnReportingSessionPreviousValues values;
+    plist::Dictionary model;
+    for (int i = 0; i < 5000; ++i) {
+      plist::Dictionary payload;
+      for (std::size_t keys = random() % 4; keys > 0; --keys) {
+        payload.set(plist::Key("key" + std::to_string(random() % 12)), i);
+      }
+      values.merge(payload);
+      model.merge(payload);
     }
-    values.merge(payload);
-    model.merge(payload);
-  }
-  EXPECT_EQ(values.dictionary(), model);
-  for (const auto& entry : model) {
-    EXPECT_EQ(values.get(entry.key), entry.value);
+    EXPECT_EQ(values.dictionary(), model);
+    for (const auto& entry : model) {
+      EXPECT_EQ(values.get(entry.key), entry.value);
+    }
   }
 }
 

@@ -4,7 +4,6 @@
 #include <poll.h>
 
 #include <atomic>
-#include <cstdio>
 #include <filesystem>
 #include <random>
 
@@ -17,6 +16,7 @@
 #include "telemetry/TarnReportingSessionRtcWorker.h"
 #include "tests/linux/Eventually.h"
 #include "tests/linux/SteadyClock.h"
+#include "tests/support/Seeds.h"
 
 namespace tarn {
 namespace {
@@ -136,57 +136,58 @@ TEST_F(RtcStress, SessionsThatWaitHoldNoThread) {
 // Sessions that come, are stopped and go at any time, with completions from threads of their own: none, one or two,
 // before or behind the stop.
 TEST_F(RtcStress, CompletionsComeFromAnyThreadAtAnyTime) {
-  const auto seed = std::random_device{}();
-  std::printf("seed %u\n", seed);
-  std::mt19937 random(seed);
-  auto& completions = platform_.rtcReporting.completions();
-  std::atomic<bool> over{false};
-  std::thread deliverer([&] {
-    while (!over) {
-      completions.deliverHeld();
-      ::poll(nullptr, 0, 1);
-    }
-  });
-  constexpr ReplyFault kFaults[] = {ReplyFault::None, ReplyFault::Hold, ReplyFault::Twice, ReplyFault::OtherThread};
-  std::vector<std::shared_ptr<TarnReportingSession>> sessions(20);
-  for (int step = 0; step < 4000; ++step) {
-    auto& session = sessions[random() % sessions.size()];
-    completions.set(kFaults[random() % std::size(kFaults)]);
-    if (!session) {
-      session = makeSession(step + 1);
-      session->start();
-    } else if (random() % 8 == 0) {
-      session.reset();
-    } else if (random() % 4 == 0) {
-      session->stop();
-      session->start();
-    } else {
-      send(*session, step);
-    }
-    if (step % 500 == 0) {
-      completions.joinThreads();
-    }
-  }
-  sessions.clear();
-  over = true;
-  deliverer.join();
-  completions.joinThreads();
-  completions.deliverHeld();
-  // A start task that runs only now has its completion held once more.
-  EXPECT_TRUE(eventually([&] {
-    completions.deliverHeld();
-    completions.joinThreads();
-    return queues_.settle(1ms);
-  }));
-  for (const auto& each : platform_.rtcReporting.sessions()) {
-    std::int64_t last = -1;
-    for (const auto& sent : each.messages) {
-      if (sent.category != 0xFFFF) {
-        ASSERT_GT(sent.payload["n"].asInt64(), last);
-        last = sent.payload["n"].asInt64();
+  for (const std::uint64_t seed : testSeeds(1)) {
+    SCOPED_TRACE(seedNote(seed));
+    std::mt19937 random(seed);
+    auto& completions = platform_.rtcReporting.completions();
+    std::atomic<bool> over{false};
+    std::thread deliverer([&] {
+      while (!over) {
+        completions.deliverHeld();
+        ::poll(nullptr, 0, 1);
+      }
+    });
+    constexpr ReplyFault kFaults[] = {ReplyFault::None, ReplyFault::Hold, ReplyFault::Twice, ReplyFault::OtherThread};
+    std::vector<std::shared_ptr<TarnReportingSession>> sessions(20);
+    for (int step = 0; step < 4000; ++step) {
+      auto& session = sessions[random() % sessions.size()];
+      completions.set(kFaults[random() % std::size(kFaults)]);
+      if (!session) {
+        session = makeSession(step + 1);
+        session->start();
+      } else if (random() % 8 == 0) {
+        session.reset();
+      } else if (random() % 4 == 0) {
+        session->stop();
+        session->start();
+      } else {
+        send(*session, step);
+      }
+      if (step % 500 == 0) {
+        completions.joinThreads();
       }
     }
-    ASSERT_TRUE(each.released);
+    sessions.clear();
+    over = true;
+    deliverer.join();
+    completions.joinThreads();
+    completions.deliverHeld();
+    // A start task that runs only now has its completion held once more.
+    EXPECT_TRUE(eventually([&] {
+      completions.deliverHeld();
+      completions.joinThreads();
+      return queues_.settle(1ms);
+    }));
+    for (const auto& each : platform_.rtcReporting.sessions()) {
+      std::int64_t last = -1;
+      for (const auto& sent : each.messages) {
+        if (sent.category != 0xFFFF) {
+          ASSERT_GT(sent.payload["n"].asInt64(), last);
+          last = sent.payload["n"].asInt64();
+        }
+      }
+      ASSERT_TRUE(each.released);
+    }
   }
 }
 

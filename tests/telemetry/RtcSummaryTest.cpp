@@ -1,11 +1,11 @@
 // The summary event: which messages it folds together, and how.
 #include <gtest/gtest.h>
 
-#include <cstdio>
 #include <map>
 #include <random>
 
 #include "telemetry/TarnReportingRtcSummary.h"
+#include "tests/support/Seeds.h"
 #include "tests/telemetry/RtcFixture.h"
 
 namespace tarn {
@@ -203,46 +203,47 @@ TEST_F(RtcSummary, KeysCountTowardsTheLimit) {
 // A slow and obvious model beside a session of random messages.
 TEST_F(RtcSummary, IsWhatAnObviousModelSaysOfRandomMessages) {
   platform_.log.setThreshold(LogLevel::Error);
-  const auto seed = std::random_device{}();
-  std::printf("seed %u\n", seed);
-  std::mt19937 random(seed);
-  const auto below = [&](unsigned limit) { return static_cast<unsigned>(random() % limit); };
-  const char* const names[] = {"route", "volume", "n", "tarnreporting_timestamp", "audiotag", "two words"};
-  const plist::Value values[] = {1, "1", 2.5F, true, "a,b", "", plist::Array{}, plist::Date{1}};
-  for (int round = 0; round < 200; ++round) {
-    const auto type = AudioServiceType{static_cast<std::uint16_t>(below(11))};
-    std::vector<std::shared_ptr<TarnReportingSessionMessage>> messages;
-    std::map<std::string, std::vector<std::string>> lists;
-    lists[std::string(kSummaryEvent)] = {std::to_string(static_cast<unsigned>(type))};
-    for (unsigned count = below(30); count > 0; --count) {
-      plist::Dictionary payload;
-      for (unsigned entries = below(6); entries > 0; --entries) {
-        payload.set(names[below(6)], values[below(8)]);
-      }
-      const auto each = message(payload);
-      each->setIsRedundant(below(4) == 0);
-      each->setIsSessionStarted(below(4) != 0);
-      messages.push_back(each);
-      if (each->isRedundant() || !each->isSessionStarted()) {
-        continue;
-      }
-      for (const char* name : names) {
-        if (payload.contains(name)) {
-          lists[name].push_back(payload[name].asText());
+  for (const std::uint64_t seed : testSeeds(1)) {
+    SCOPED_TRACE(seedNote(seed));
+    std::mt19937 random(seed);
+    const auto below = [&](unsigned limit) { return static_cast<unsigned>(random() % limit); };
+    const char* const names[] = {"route", "volume", "n", "tarnreporting_timestamp", "audiotag", "two words"};
+    const plist::Value values[] = {1, "1", 2.5F, true, "a,b", "", plist::Array{}, plist::Date{1}};
+    for (int round = 0; round < 200; ++round) {
+      const auto type = AudioServiceType{static_cast<std::uint16_t>(below(11))};
+      std::vector<std::shared_ptr<TarnReportingSessionMessage>> messages;
+      std::map<std::string, std::vector<std::string>> lists;
+      lists[std::string(kSummaryEvent)] = {std::to_string(static_cast<unsigned>(type))};
+      for (unsigned count = below(30); count > 0; --count) {
+        plist::Dictionary payload;
+        for (unsigned entries = below(6); entries > 0; --entries) {
+          payload.set(names[below(6)], values[below(8)]);
+        }
+        const auto each = message(payload);
+        each->setIsRedundant(below(4) == 0);
+        each->setIsSessionStarted(below(4) != 0);
+        messages.push_back(each);
+        if (each->isRedundant() || !each->isSessionStarted()) {
+          continue;
+        }
+        for (const char* name : names) {
+          if (payload.contains(name)) {
+            lists[name].push_back(payload[name].asText());
+          }
         }
       }
-    }
-    plist::Dictionary expected;
-    for (const auto& [key, list] : lists) {
-      std::string joined;
-      for (std::size_t i = 0; i < list.size(); ++i) {
-        joined += (i == 0 ? "" : ",") + list[i];
+      plist::Dictionary expected;
+      for (const auto& [key, list] : lists) {
+        std::string joined;
+        for (std::size_t i = 0; i < list.size(); ++i) {
+          joined += (i == 0 ? "" : ",") + list[i];
+        }
+        expected.set(plist::Key(key), joined);
       }
-      expected.set(plist::Key(key), joined);
+      const auto summary = TarnReportingMakeRtcSummary(type, messages);
+      ASSERT_TRUE(summary.complete);
+      ASSERT_EQ(summary.payload, expected) << plist::description(summary.payload);
     }
-    const auto summary = TarnReportingMakeRtcSummary(type, messages);
-    ASSERT_TRUE(summary.complete);
-    ASSERT_EQ(summary.payload, expected) << plist::description(summary.payload);
   }
 }
 

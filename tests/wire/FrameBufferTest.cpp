@@ -1,3 +1,4 @@
+#include "tests/support/Seeds.h"
 #include "wire/FrameBuffer.h"
 
 #include <gtest/gtest.h>
@@ -137,23 +138,24 @@ TEST(FrameBuffer, ReleaseGivesMemoryBackOnlyWhenNothingIsPending) {
 }
 
 TEST(FrameBuffer, RandomPiecesYieldTheFramesThatWereSent) {
-  const unsigned seed = std::random_device{}();
-  SCOPED_TRACE("seed " + std::to_string(seed));
-  std::mt19937 random(seed);
-  FrameBuffer buffer(300000);
-  std::vector<std::string> sent;
-  std::string stream;
-  for (int i = 0; i < 200; ++i) {
-    const std::size_t size = i % 20 == 0 ? random() % 300000 : random() % 400;
-    sent.emplace_back(size, static_cast<char>('a' + i % 26));
-    stream += framed(sent.back());
+  for (const std::uint64_t seed : tarn::testing::testSeeds(1)) {
+    SCOPED_TRACE(tarn::testing::seedNote(seed));
+    std::mt19937 random(seed);
+    FrameBuffer buffer(300000);
+    std::vector<std::string> sent;
+    std::string stream;
+    for (int i = 0; i < 200; ++i) {
+      const std::size_t size = i % 20 == 0 ? random() % 300000 : random() % 400;
+      sent.emplace_back(size, static_cast<char>('a' + i % 26));
+      stream += framed(sent.back());
+    }
+    std::vector<std::string> got;
+    for (std::size_t at = 0; at < stream.size();) {
+      at += feed(buffer, std::string_view(stream).substr(at, 1 + random() % 100000));
+      for (std::string& frame : takeAll(buffer)) got.push_back(std::move(frame));
+    }
+    EXPECT_TRUE(got == sent);
   }
-  std::vector<std::string> got;
-  for (std::size_t at = 0; at < stream.size();) {
-    at += feed(buffer, std::string_view(stream).substr(at, 1 + random() % 100000));
-    for (std::string& frame : takeAll(buffer)) got.push_back(std::move(frame));
-  }
-  EXPECT_TRUE(got == sent);
 }
 
 }  // namespace

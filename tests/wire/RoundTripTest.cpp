@@ -5,6 +5,7 @@
 #include <random>
 
 #include "plist/Value.h"
+#include "tests/support/Seeds.h"
 #include "tests/wire/Bytes.h"
 #include "wire/Encoder.h"
 #include "wire/WellFormed.h"
@@ -17,7 +18,7 @@ using testing::asBytes;
 
 class Maker {
  public:
-  explicit Maker(unsigned seed) : random_(seed) {}
+  explicit Maker(std::uint64_t seed) : random_(seed) {}
 
   std::size_t below(std::size_t limit) { return random_() % limit; }
 
@@ -108,84 +109,84 @@ json toPeer(const plist::ValueView& value) {
   }
 }
 
-unsigned freshSeed() {
-  return std::random_device{}();
-}
-
 TEST(RoundTrip, APeerReadsWhatIsEncoded) {
-  const unsigned seed = freshSeed();
-  SCOPED_TRACE("seed " + std::to_string(seed));
-  Maker maker(seed);
-  for (int i = 0; i < 2000; ++i) {
-    const plist::Dictionary dictionary = maker.dictionary(1);
-    std::string bytes;
-    appendValue(bytes, dictionary);
-    EXPECT_EQ(json::from_cbor(bytes), toPeer(dictionary));
+  for (const std::uint64_t seed : tarn::testing::testSeeds(1)) {
+    SCOPED_TRACE(tarn::testing::seedNote(seed));
+    Maker maker(seed);
+    for (int i = 0; i < 2000; ++i) {
+      const plist::Dictionary dictionary = maker.dictionary(1);
+      std::string bytes;
+      appendValue(bytes, dictionary);
+      EXPECT_EQ(json::from_cbor(bytes), toPeer(dictionary));
+    }
   }
 }
 
 TEST(RoundTrip, WhatAPeerEncodesIsRead) {
-  const unsigned seed = freshSeed();
-  SCOPED_TRACE("seed " + std::to_string(seed));
-  Maker maker(seed);
-  for (int i = 0; i < 2000; ++i) {
-    const plist::Dictionary dictionary = maker.dictionary(1);
-    std::vector<std::uint8_t> bytes = json::to_cbor(toPeer(dictionary));
-    const testing::Decoded decoded = testing::decodeBytes(
-        testing::configurationFrame(std::string_view(reinterpret_cast<const char*>(bytes.data()), bytes.size())));
-    ASSERT_TRUE(decoded.ok()) << decoded.refusal.text;
-    EXPECT_EQ(decoded.request.dictionary, dictionary);
+  for (const std::uint64_t seed : tarn::testing::testSeeds(2)) {
+    SCOPED_TRACE(tarn::testing::seedNote(seed));
+    Maker maker(seed);
+    for (int i = 0; i < 2000; ++i) {
+      const plist::Dictionary dictionary = maker.dictionary(1);
+      std::vector<std::uint8_t> bytes = json::to_cbor(toPeer(dictionary));
+      const testing::Decoded decoded = testing::decodeBytes(
+          testing::configurationFrame(std::string_view(reinterpret_cast<const char*>(bytes.data()), bytes.size())));
+      ASSERT_TRUE(decoded.ok()) << decoded.refusal.text;
+      EXPECT_EQ(decoded.request.dictionary, dictionary);
+    }
   }
 }
 
 TEST(RoundTrip, DecodingAndEncodingAgainYieldsTheSameBytes) {
-  const unsigned seed = freshSeed();
-  SCOPED_TRACE("seed " + std::to_string(seed));
-  Maker maker(seed);
-  for (int i = 0; i < 2000; ++i) {
-    Request request;
-    request.operation = Operation::SendMessage;
-    request.dictionary = maker.dictionary(1);
-    std::string bytes;
-    Encoder(bytes).request(maker.below(1000000), request);
-    const testing::Decoded decoded = testing::decodeBytes(std::string_view(bytes).substr(kFrameHeaderBytes));
-    ASSERT_TRUE(decoded.ok()) << decoded.refusal.text;
-    std::string again;
-    Encoder(again).request(decoded.request.id, decoded.request);
-    EXPECT_EQ(again, bytes);
+  for (const std::uint64_t seed : tarn::testing::testSeeds(3)) {
+    SCOPED_TRACE(tarn::testing::seedNote(seed));
+    Maker maker(seed);
+    for (int i = 0; i < 2000; ++i) {
+      Request request;
+      request.operation = Operation::SendMessage;
+      request.dictionary = maker.dictionary(1);
+      std::string bytes;
+      Encoder(bytes).request(maker.below(1000000), request);
+      const testing::Decoded decoded = testing::decodeBytes(std::string_view(bytes).substr(kFrameHeaderBytes));
+      ASSERT_TRUE(decoded.ok()) << decoded.refusal.text;
+      std::string again;
+      Encoder(again).request(decoded.request.id, decoded.request);
+      EXPECT_EQ(again, bytes);
+    }
   }
 }
 
 // Damaged frames are accepted, refused or unreadable as the independent check of well-formedness says, and never more.
 TEST(RoundTrip, DamagedFramesGetAnOutcomeThatFitsTheirBytes) {
-  const unsigned seed = freshSeed();
-  SCOPED_TRACE("seed " + std::to_string(seed));
-  Maker maker(seed);
-  int outcomes[3] = {};
-  for (int i = 0; i < 20000; ++i) {
-    Request request;
-    request.operation = Operation::SendMessage;
-    request.dictionary = maker.dictionary(2);
-    request.reporterIDs = std::vector<std::int64_t>{1, 2};
-    std::string bytes;
-    Encoder(bytes).request(5, request);
-    bytes.erase(0, kFrameHeaderBytes);
-    for (std::size_t changes = 1 + maker.below(4); changes > 0; --changes) {
-      bytes[maker.below(bytes.size())] = static_cast<char>(maker.below(256));
+  for (const std::uint64_t seed : tarn::testing::testSeeds(4)) {
+    SCOPED_TRACE(tarn::testing::seedNote(seed));
+    Maker maker(seed);
+    int outcomes[3] = {};
+    for (int i = 0; i < 20000; ++i) {
+      Request request;
+      request.operation = Operation::SendMessage;
+      request.dictionary = maker.dictionary(2);
+      request.reporterIDs = std::vector<std::int64_t>{1, 2};
+      std::string bytes;
+      Encoder(bytes).request(5, request);
+      bytes.erase(0, kFrameHeaderBytes);
+      for (std::size_t changes = 1 + maker.below(4); changes > 0; --changes) {
+        bytes[maker.below(bytes.size())] = static_cast<char>(maker.below(256));
+      }
+      const testing::Decoded decoded = testing::decodeBytes(bytes);
+      ++outcomes[static_cast<std::size_t>(decoded.outcome)];
+      const bool wellFormed = checkOneItem(asBytes(bytes)) == nullptr;
+      if (!decoded.unreadable()) {
+        EXPECT_TRUE(wellFormed) << testing::toHex(bytes);
+      } else if (wellFormed) {
+        EXPECT_TRUE(decoded.refusal.text == "no readable id" || decoded.refusal.text == "not a CBOR array")
+            << decoded.refusal.text << " " << testing::toHex(bytes);
+      }
     }
-    const testing::Decoded decoded = testing::decodeBytes(bytes);
-    ++outcomes[static_cast<std::size_t>(decoded.outcome)];
-    const bool wellFormed = checkOneItem(asBytes(bytes)) == nullptr;
-    if (!decoded.unreadable()) {
-      EXPECT_TRUE(wellFormed) << testing::toHex(bytes);
-    } else if (wellFormed) {
-      EXPECT_TRUE(decoded.refusal.text == "no readable id" || decoded.refusal.text == "not a CBOR array")
-          << decoded.refusal.text << " " << testing::toHex(bytes);
-    }
+    EXPECT_GT(outcomes[0], 0);
+    EXPECT_GT(outcomes[1], 0);
+    EXPECT_GT(outcomes[2], 0);
   }
-  EXPECT_GT(outcomes[0], 0);
-  EXPECT_GT(outcomes[1], 0);
-  EXPECT_GT(outcomes[2], 0);
 }
 
 }  // namespace

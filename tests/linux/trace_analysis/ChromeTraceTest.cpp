@@ -7,6 +7,7 @@
 #include <random>
 
 #include "tests/linux/TemporaryFolder.h"
+#include "tests/support/Seeds.h"
 
 namespace tarn::trace_analysis {
 namespace {
@@ -155,41 +156,42 @@ TEST(ChromeTrace, FilesThatCantBeReadAreFailures) {
 
 // A slow and obvious pairing: every end looks for its begin from the newest backwards.
 TEST(ChromeTrace, PairsAsAStackOfEachThreadDoes) {
-  const auto seed = std::random_device()();
-  std::cout << "seed " << seed << '\n';
-  std::mt19937 random(seed);
-  for (int round = 0; round < 200; ++round) {
-    struct Open {
-      std::string name;
-      int time;
-    };
-    std::vector<std::vector<Open>> stacks(3);
-    std::vector<std::pair<int, std::string>> expected;
-    std::string events;
-    for (int time = 1; time <= 60; ++time) {
-      const auto thread = random() % stacks.size();
-      const std::string name(1, static_cast<char>('a' + random() % 3));
-      const bool begins = random() % 2 == 0;
-      events += (events.empty() ? "" : ",") + event(begins ? "B" : "E", name, time, static_cast<int>(thread));
-      auto& stack = stacks[thread];
-      if (begins) {
-        stack.push_back({name, time});
-        continue;
+  for (const std::uint64_t seed : tarn::testing::testSeeds(1)) {
+    SCOPED_TRACE(tarn::testing::seedNote(seed));
+    std::mt19937 random(seed);
+    for (int round = 0; round < 200; ++round) {
+      struct Open {
+        std::string name;
+        int time;
+      };
+      std::vector<std::vector<Open>> stacks(3);
+      std::vector<std::pair<int, std::string>> expected;
+      std::string events;
+      for (int time = 1; time <= 60; ++time) {
+        const auto thread = random() % stacks.size();
+        const std::string name(1, static_cast<char>('a' + random() % 3));
+        const bool begins = random() % 2 == 0;
+        events += (events.empty() ? "" : ",") + event(begins ? "B" : "E", name, time, static_cast<int>(thread));
+        auto& stack = stacks[thread];
+        if (begins) {
+          stack.push_back({name, time});
+          continue;
+        }
+        for (std::size_t i = stack.size(); i-- > 0;) {
+          if (stack[i].name != name) continue;
+          expected.emplace_back(stack[i].time, "s " + name + " " + std::to_string(stack[i].time * 1000) + "+" +
+                                                   std::to_string((time - stack[i].time) * 1000));
+          stack.resize(i);
+          break;
+        }
       }
-      for (std::size_t i = stack.size(); i-- > 0;) {
-        if (stack[i].name != name) continue;
-        expected.emplace_back(stack[i].time, "s " + name + " " + std::to_string(stack[i].time * 1000) + "+" +
-                                                 std::to_string((time - stack[i].time) * 1000));
-        stack.resize(i);
-        break;
+      std::sort(expected.begin(), expected.end());
+      Strings texts;
+      for (const auto& [time, text] : expected) {
+        texts.push_back(text);
       }
+      ASSERT_EQ(intervalsOf(events), texts) << "round " << round;
     }
-    std::sort(expected.begin(), expected.end());
-    Strings texts;
-    for (const auto& [time, text] : expected) {
-      texts.push_back(text);
-    }
-    ASSERT_EQ(intervalsOf(events), texts) << "round " << round;
   }
 }
 

@@ -1,4 +1,5 @@
 #include "platform/linux/trace_analysis/Probes.h"
+#include "tests/support/Seeds.h"
 
 #include <gtest/gtest.h>
 
@@ -105,20 +106,21 @@ bool obviously(std::string_view pattern, std::string_view text) {
 }
 
 TEST(ProbePattern, MatchesAsTheRuleSays) {
-  const auto seed = std::random_device()();
-  std::cout << "seed " << seed << '\n';
-  std::mt19937 random(seed);
-  const auto made = [&](std::string_view letters, std::size_t most) {
-    std::string text;
-    for (std::size_t left = random() % most; left > 0; --left) {
-      text += letters[random() % letters.size()];
+  for (const std::uint64_t seed : tarn::testing::testSeeds(1)) {
+    SCOPED_TRACE(tarn::testing::seedNote(seed));
+    std::mt19937 random(seed);
+    const auto made = [&](std::string_view letters, std::size_t most) {
+      std::string text;
+      for (std::size_t left = random() % most; left > 0; --left) {
+        text += letters[random() % letters.size()];
+      }
+      return text;
+    };
+    for (int round = 0; round < 20000; ++round) {
+      const std::string pattern = made("ab*?", 8);
+      const std::string text = made("ab", 10);
+      ASSERT_EQ(matchesPattern(pattern, text), obviously(pattern, text)) << pattern << " and " << text;
     }
-    return text;
-  };
-  for (int round = 0; round < 20000; ++round) {
-    const std::string pattern = made("ab*?", 8);
-    const std::string text = made("ab", 10);
-    ASSERT_EQ(matchesPattern(pattern, text), obviously(pattern, text)) << pattern << " and " << text;
   }
 }
 
