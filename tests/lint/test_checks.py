@@ -9,6 +9,7 @@ sys.path.insert(0, os.path.join(HERE, "..", "..", "tools", "lint"))
 
 import banned_calls  # noqa: E402
 import include_graph  # noqa: E402
+import seeds  # noqa: E402
 import sizes  # noqa: E402
 import wording  # noqa: E402
 from tree import Tree, code_only  # noqa: E402
@@ -188,6 +189,33 @@ class BannedCalls(unittest.TestCase):
         text = "auto* p = new Body;\n"
         self.assertEqual(found(banned_calls, {"plist/Packed.cpp": text}), [])
         self.assertEqual(found(banned_calls, {"platform/linux/Loop.cpp": text}), [("platform/linux/Loop.cpp", 1)])
+
+
+class Seeds(unittest.TestCase):
+    WRONG = (
+        "std::random_device device;", "std::mt19937 random(std::random_device{}());", "std::mt19937 random(7);",
+        "std::mt19937_64 random{7};", "std::mt19937 random;", "std::minstd_rand random;", "std::mt19937 random{};",
+        "shuffle(a, b, std::mt19937{});", "shuffle(a, b, std::mt19937(5));", "std::default_random_engine random;",
+    )
+    FINE = (
+        "std::mt19937 random(seed);", "std::mt19937_64 random(seed + thread);", "std::mt19937& random",
+        "explicit Drawn(std::uint64_t seed) : random_(seed) {}\nstd::mt19937 random_;",
+        "std::mt19937 random_;\nrandom_.seed(seed);", "shuffle(a, b, std::mt19937(seed));", "// std::mt19937 r(7);",
+    )
+
+    def test_an_engine_with_another_seed_is_reported(self):
+        for text in self.WRONG:
+            with self.subTest(text):
+                self.assertIn(("tests/wire/ATest.cpp", 2), found(seeds, {"tests/wire/ATest.cpp": f"\n{text}\n"}))
+
+    def test_an_engine_with_a_given_seed_is_fine(self):
+        for text in self.FINE:
+            with self.subTest(text):
+                self.assertEqual(found(seeds, {"tests/wire/ATest.cpp": f"\n{text}\n"}), [])
+
+    def test_only_tests_are_looked_at_and_not_where_seeds_come_from(self):
+        for path in ("bench/A.cpp", "platform/linux/A.cpp", seeds.SOURCE):
+            self.assertEqual(found(seeds, {path: "std::random_device device;\n"}), [])
 
 
 class Sizes(unittest.TestCase):
