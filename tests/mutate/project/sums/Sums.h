@@ -1,0 +1,17 @@
+#pragma once
+
+#include <string>
+#include <vector>
+
+namespace sums {
+
+inline bool isSmall(int number) {
+  return number < 10;
+}
+
+int larger(int a, int b);
+int limited(int number);
+std::vector<std::string> steps(bool skipsLast);
+int nobodyCalls(int number);
+
+}  // namespace sums
