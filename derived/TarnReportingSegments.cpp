@@ -8,17 +8,6 @@ namespace tarn {
 
 namespace {
 
-constexpr std::array<double, 11> kTimes{0, 1, 5, 10, 30, 60, 300, 1800, 3600, 7200, 18000};
-
-constexpr std::size_t kVolumeSteps = 16;
-constexpr std::array<double, kVolumeSteps + 1> kVolumes = [] {
-  std::array<double, kVolumeSteps + 1> bounds{};
-  for (std::size_t i = 0; i < bounds.size(); ++i) {
-    bounds[i] = static_cast<double>(i) / kVolumeSteps;
-  }
-  return bounds;
-}();
-
 const plist::Key kMessageCount("msgcnt");
 
 }  // namespace
@@ -40,19 +29,30 @@ bool TarnReportingTextsDiffer(const plist::ValueView& first, const plist::ValueV
 }
 
 std::span<const double> TarnReportingUtilityBucketNumberToStringTimes() noexcept {
-  return kTimes;
+  static constexpr std::array<double, 11> kBounds{0, 1, 5, 10, 30, 60, 300, 1800, 3600, 7200, 18000};
+  return kBounds;
 }
 
 std::span<const double> TarnReportingUtilityBucketNumberToStringVolumes() noexcept {
-  return kVolumes;
+  static constexpr std::size_t kSteps = 16;
+  static constexpr auto kBounds = [] {
+    std::array<double, kSteps + 1> bounds{};
+    for (std::size_t i = 0; i < bounds.size(); ++i) {
+      bounds[i] = static_cast<double>(i) / kSteps;
+    }
+    return bounds;
+  }();
+  return kBounds;
 }
 
 std::string TarnReportingSegmentLengthLabel(double seconds) {
-  return TarnReportingUtilityBucketNumberToString(seconds, kTimes, 0).value_or(std::string());
+  return TarnReportingUtilityBucketNumberToString(seconds, TarnReportingUtilityBucketNumberToStringTimes(), 0)
+      .value_or(std::string());
 }
 
 std::string TarnReportingVolumeLabel(double volume) {
-  return TarnReportingUtilityBucketNumberToString(volume, kVolumes, 4).value_or(std::string());
+  return TarnReportingUtilityBucketNumberToString(volume, TarnReportingUtilityBucketNumberToStringVolumes(), 4)
+      .value_or(std::string());
 }
 
 void TarnReportingNumberMessages(const TarnReportingSessionMessages& derived) {

@@ -56,11 +56,10 @@ const Fields::Keys kKeys{plist::Key("tarnreporting_timestamp"),
 const std::array<plist::Key, 2> kKeysToCombine{plist::Key("spatial-audio-accessory-feature"),
                                                plist::Key("spatializationEnabled")};
 
-// The format's two values, which nothing here looks at, are left out of the state.
+// The format's two values and the codec's rate, which nothing here looks at again, are left out of the state.
 Fields initialState(const TarnReportingSessionPreviousValues& previousValues) {
   Fields state;
-  for (const Field field :
-       {Field::ActiveDevices, Field::OperationMode, Field::InputPort, Field::VocoderRate, Field::Vocoder}) {
+  for (const Field field : {Field::ActiveDevices, Field::OperationMode, Field::InputPort, Field::Vocoder}) {
     state[field] = "unknown";
   }
   state.merge(Fields(kKeys, previousValues));
@@ -76,6 +75,7 @@ class InputWalk {
   TarnReportingSessionMessages finish();
 
  private:
+  // For a field that the state holds from the beginning on.
   bool differsFromState(const Fields& message, Field field) const;
   void noteCodec(const Fields& message);
   void endSegment(const plist::ValueView& time);
@@ -103,7 +103,7 @@ void InputWalk::take(const plist::Dictionary& payload) {
     if (running_ && !wasRunning) {
       clock_.startAt(time);
     }
-    changed = changed || (!running_ && wasRunning);
+    changed = changed || !running_;
   } else {
     running_ = running_ && !hasEnd;
   }
@@ -121,7 +121,7 @@ void InputWalk::take(const plist::Dictionary& payload) {
 }
 
 bool InputWalk::differsFromState(const Fields& message, Field field) const {
-  return message[field].present() && state_[field].present() && !(message[field] == state_[field]);
+  return message[field].present() && !(message[field] == state_[field]);
 }
 
 void InputWalk::noteCodec(const Fields& message) {

@@ -26,10 +26,11 @@ class TarnReportingSessionInputMessagesWorker : public TarnReportingSessionWorke
 
   void stop();
 
-  // The summary messages of these messages, in order. `previousValues`: the latest values from before the first of
-  // them. `process`: the application's name; nothing comes out when it is empty. Segments of `minimumRunningtime`
-  // seconds or less are left out; the codecs seen in them count for the next message. Bursts of the spatial settings
-  // are folded into one message, in place.
+  // The summary messages of these messages, in order. `previousValues`: the values from which the walk starts. At a
+  // stop they are the session's, so they are older than the first message only under keys that none of these messages
+  // has; under the others they are already the last of these. `process`: the application's name; nothing comes out
+  // when it is empty. Segments of `minimumRunningtime` seconds or less are left out; the codecs seen in them count for
+  // the next message. Bursts of the spatial settings are folded into one message, in place.
   static TarnReportingSessionMessages createInputMessages(const TarnReportingSessionMessages& messages,
                                                           const TarnReportingSessionPreviousValues& previousValues,
                                                           std::string_view process, double minimumRunningtime);

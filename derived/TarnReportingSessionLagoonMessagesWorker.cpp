@@ -1,11 +1,9 @@
 #include "derived/TarnReportingSessionLagoonMessagesWorker.h"
 
 #include <array>
-#include <initializer_list>
 #include <string>
 
 #include "derived/TarnReportingDerivation.h"
-#include "derived/TarnReportingMessageFields.h"
 #include "derived/TarnReportingSegments.h"
 #include "service/TarnReportingLog.h"
 #include "service/TarnReportingUtility.h"
@@ -15,21 +13,12 @@ namespace tarn {
 
 namespace {
 
-constexpr std::string_view kModule = TarnReportingSessionLagoonMessagesWorker::kClassName;
-constexpr std::string_view kOperation = "createLagoonMessages";
+using Worker = TarnReportingSessionLagoonMessagesWorker;
+using Field = Worker::Field;
+using Fields = Worker::Fields;
 
-enum class Field : std::size_t {
-  Timestamp,
-  Running,
-  GroupSession,
-  Duration,
-  SelectedFormat,
-  ActiveDevices,
-  FormatID,
-  Channels,
-  Count,
-};
-using Fields = TarnReportingMessageFields<Field>;
+constexpr std::string_view kModule = Worker::kClassName;
+constexpr std::string_view kOperation = "createLagoonMessages";
 
 const plist::Key kSelectedFormat("session_selected_format");
 const plist::Key kActiveDevices("active_devices");
@@ -59,35 +48,6 @@ Fields defaultValues() {
 
 bool bothHold(Field key, const Fields& left, const Fields& right) {
   return left[key].present() && right[key].present();
-}
-
-bool didStringChangeInKey(Field key, const Fields& left, const Fields& right) {
-  return bothHold(key, left, right) && TarnReportingTextsDiffer(left[key], right[key]);
-}
-
-bool didIntChangeInKey(Field key, const Fields& left, const Fields& right) {
-  return bothHold(key, left, right) && left[key].asInt64() != right[key].asInt64();
-}
-
-bool didBoolChangeInKey(Field key, const Fields& left, const Fields& right) {
-  return bothHold(key, left, right) && left[key].asBool() != right[key].asBool();
-}
-
-bool watchedFieldChangeInMessage(const Fields& message, const Fields& previous) {
-  return didBoolChangeInKey(Field::Running, message, previous) ||
-         didIntChangeInKey(Field::GroupSession, message, previous) ||
-         didIntChangeInKey(Field::Channels, message, previous) ||
-         didStringChangeInKey(Field::FormatID, message, previous) ||
-         didStringChangeInKey(Field::ActiveDevices, message, previous);
-}
-
-plist::ValueView coalesceKey(Field key, std::initializer_list<const Fields*> sources) {
-  for (const Fields* source : sources) {
-    if ((*source)[key].present()) {
-      return (*source)[key];
-    }
-  }
-  return {};
 }
 
 bool isInGroup(const plist::ValueView& groupSession) {
@@ -141,7 +101,7 @@ void LagoonWalk::take(const plist::Dictionary& payload) {
   inGroup_ = inGroup_ && !hasEnd;
   running_ = running_ && !hasEnd;
 
-  const bool closes = hasEnd || (wasRunning && wasGroup && watchedFieldChangeInMessage(message, state_));
+  const bool closes = hasEnd || (wasRunning && wasGroup && Worker::watchedFieldChangeInMessage(message, state_));
   if (closes && clock_.started()) {
     endSegment(time);
   }
@@ -176,10 +136,10 @@ void LagoonWalk::endSegment(const plist::ValueView& time) {
 std::shared_ptr<TarnReportingSessionMessage> LagoonWalk::makeMessage(double seconds) const {
   const std::string lengthLabel = TarnReportingSegmentLengthLabel(seconds);
   const std::array<plist::Dictionary::Entry, 7> payload{{
-      {kSelectedFormat, coalesceKey(Field::SelectedFormat, {&state_, &defaults_})},
-      {kActiveDevices, coalesceKey(Field::ActiveDevices, {&state_, &defaults_})},
-      {kFormatID, coalesceKey(Field::FormatID, {&state_, &defaults_})},
-      {kChannels, coalesceKey(Field::Channels, {&state_, &defaults_})},
+      {kSelectedFormat, Worker::coalesceKey(Field::SelectedFormat, {&state_, &defaults_})},
+      {kActiveDevices, Worker::coalesceKey(Field::ActiveDevices, {&state_, &defaults_})},
+      {kFormatID, Worker::coalesceKey(Field::FormatID, {&state_, &defaults_})},
+      {kChannels, Worker::coalesceKey(Field::Channels, {&state_, &defaults_})},
       {kPlaySeconds, static_cast<float>(seconds)},
       {kPlaySecondsLabel, lengthLabel},
       {kTarnReportingMessageIndex, derived_.size() + 1},
@@ -198,6 +158,42 @@ TarnReportingSessionMessages LagoonWalk::finish() {
 }
 
 }  // namespace
+
+const Fields::Keys& TarnReportingSessionLagoonMessagesWorker::fieldKeys() noexcept {
+  return kKeys;
+}
+
+bool TarnReportingSessionLagoonMessagesWorker::watchedFieldChangeInMessage(const Fields& message,
+                                                                           const Fields& previous) {
+  return didBoolChangeInKey(Field::Running, message, previous) ||
+         didIntChangeInKey(Field::GroupSession, message, previous) ||
+         didIntChangeInKey(Field::Channels, message, previous) ||
+         didStringChangeInKey(Field::FormatID, message, previous) ||
+         didStringChangeInKey(Field::ActiveDevices, message, previous);
+}
+
+bool TarnReportingSessionLagoonMessagesWorker::didStringChangeInKey(Field key, const Fields& left,
+                                                                    const Fields& right) {
+  return bothHold(key, left, right) && TarnReportingTextsDiffer(left[key], right[key]);
+}
+
+bool TarnReportingSessionLagoonMessagesWorker::didIntChangeInKey(Field key, const Fields& left, const Fields& right) {
+  return bothHold(key, left, right) && left[key].asInt64() != right[key].asInt64();
+}
+
+bool TarnReportingSessionLagoonMessagesWorker::didBoolChangeInKey(Field key, const Fields& left, const Fields& right) {
+  return bothHold(key, left, right) && left[key].asBool() != right[key].asBool();
+}
+
+plist::ValueView TarnReportingSessionLagoonMessagesWorker::coalesceKey(
+    Field key, std::initializer_list<const Fields*> sourceDicts) {
+  for (const Fields* source : sourceDicts) {
+    if ((*source)[key].present()) {
+      return (*source)[key];
+    }
+  }
+  return {};
+}
 
 TarnReportingSessionMessages TarnReportingSessionLagoonMessagesWorker::createLagoonMessages(
     const TarnReportingSessionMessages& messages, const TarnReportingSessionPreviousValues& previousValues,

@@ -67,12 +67,12 @@ void markSessionStarted(TarnReportingSessionMessage& message) {
   message.mutableMessage().set(kIsSessionStarted, message.isSessionStarted() ? "YES" : "NO");
 }
 
-// Forms the message's object in `text`, replacing what is there. Whether JSON can hold it; what can't isn't counted.
-bool formObject(std::string& text, const TarnReportingSessionMessage& message, Counts& counts) {
+// Appends the message's object to `text`. Whether JSON can hold it; what can't isn't counted.
+bool appendObject(std::string& text, const TarnReportingSessionMessage& message, Counts& counts) {
   std::string name = TarnReportingUtilityCategoryString(message.category()) + "_";
   name += TarnReportingUtilityTypeString(message.type());
   std::uint64_t& count = counts[name];
-  text = "{\n  ";
+  text += "{\n  ";
   plist::appendJsonText(text, name + "_" + std::to_string(count + 1));
   text += ": ";
   if (const auto misfit = plist::appendPrettyJson(text, message.message(), 1)) {
@@ -107,8 +107,8 @@ void TarnReportingSessionSummaryJsonFileWorker::stop() {
 
 void TarnReportingSessionSummaryJsonFileWorker::writeMessages(const TarnReportingSession& session) {
   Counts counts;
-  std::string object;
-  bool needsComma = false;
+  std::string lines;
+  bool isFirst = true;
   for (const auto& message : session.messages()) {
     if (message->isRedundant()) {
       continue;
@@ -117,13 +117,14 @@ void TarnReportingSessionSummaryJsonFileWorker::writeMessages(const TarnReportin
       return;
     }
     markSessionStarted(*message);
-    if (!formObject(object, *message, counts)) {
+    lines = isFirst ? "" : ",\n";
+    if (!appendObject(lines, *message, counts)) {
       continue;
     }
-    if ((needsComma && !writeLine(",")) || !writeLine(object)) {
+    if (!writeLine(lines)) {
       return;
     }
-    needsComma = true;
+    isFirst = false;
   }
 }
 
@@ -153,15 +154,12 @@ bool TarnReportingSessionSummaryJsonFileWorker::openFile(const TarnReportingSess
   return writeLine("[");
 }
 
-bool TarnReportingSessionSummaryJsonFileWorker::writeLine(std::string_view line) {
+bool TarnReportingSessionSummaryJsonFileWorker::writeLine(std::string line) {
   if (writeFailed_) {
-    return false;  // behind a gap the rest would be worth nothing
+    return false;  // after a gap the rest would be worth nothing
   }
-  platform::MaybeError error = reportFileHandle_->write(line);
-  if (!error) {
-    error = reportFileHandle_->write("\n");
-  }
-  if (error) {
+  line += '\n';
+  if (const auto error = reportFileHandle_->write(line)) {
     log(LogLevel::Error, "SummaryJsonFileWorker failed to write line. action=writeline file=%@ error=\"%@\"",
         reportPath_, error->text);
     writeFailed_ = true;

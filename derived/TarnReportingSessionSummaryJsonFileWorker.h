@@ -2,9 +2,9 @@
 // of its log that is not redundant, derived ones included, is written into a JSON array in the audio diagnostic-logs
 // directory; for inspection on test devices and internal ones.
 //
-// The file is written message by message; no more than one message's text is held. A message with a value that JSON
-// can't hold is left out. When the disk refuses, what was written so far stays, nothing more is written to that file,
-// and the session ends as usual.
+// The file is written message by message: no more than one message's text is held, and each is in the file before the
+// next is formed. A message with a value that JSON can't hold is left out. When the disk refuses, what was written so
+// far stays, nothing more is written to that file, and the session ends as usual.
 #pragma once
 
 #include <memory>
@@ -31,7 +31,8 @@ class TarnReportingSessionSummaryJsonFileWorker : public TarnReportingSessionWor
  private:
   bool openFile(const TarnReportingSession& session);
   void writeMessages(const TarnReportingSession& session);
-  bool writeLine(std::string_view line);
+  // The line, or the lines of one message, by one write. False once a write failed.
+  bool writeLine(std::string line);
   void closeFile();
 
   std::string reportPath_;                                    // empty when no file is open

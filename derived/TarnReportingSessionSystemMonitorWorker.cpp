@@ -24,14 +24,6 @@ plist::Dictionary payloadOf(const plist::Dictionary& state) {
   return payload;
 }
 
-void handleChange(TarnReportingSession& session, const plist::Dictionary& state) {
-  plist::Dictionary payload = payloadOf(state);
-  if (!payload.empty()) {
-    session.sendMessage(std::make_shared<TarnReportingSessionMessage>(std::move(payload), AudioEventCategory::Setup,
-                                                                      AudioEventType::Setup));
-  }
-}
-
 }  // namespace
 
 std::unique_ptr<TarnReportingSessionSystemMonitorWorker> TarnReportingSessionSystemMonitorWorker::initWithSession(
@@ -65,22 +57,29 @@ bool TarnReportingSessionSystemMonitorWorker::start() {
       state = systemMonitorDictionary_->state(feature);
       observe(feature);
     }
-    handleChange(*owner, state);
+    handleChange(state);
   }
   return true;
 }
 
 void TarnReportingSessionSystemMonitorWorker::observe(const plist::Key& feature) {
-  // The dictionary owns the observer; neither it nor the session may live on by it.
+  // The dictionary owns the observer, so the session may not live on by it; the session owns this worker, and with it
+  // a share of the dictionary.
   observers_.push_back(systemMonitorDictionary_->addObserver(
-      feature, [weakSession = std::weak_ptr(session()),
-                weakDictionary = std::weak_ptr(systemMonitorDictionary_)](const plist::Key& changed) {
-        const std::shared_ptr<TarnReportingSession> owner = weakSession.lock();
-        const std::shared_ptr<TarnReportingSystemMonitorDictionary> dictionary = weakDictionary.lock();
-        if (owner && dictionary) {
-          handleChange(*owner, dictionary->state(changed));
+      feature, [this, weakSession = std::weak_ptr(session())](const plist::Key& changed) {
+        if (const std::shared_ptr<TarnReportingSession> owner = weakSession.lock()) {
+          handleChange(systemMonitorDictionary_->state(changed));
         }
       }));
+}
+
+void TarnReportingSessionSystemMonitorWorker::handleChange(const plist::Dictionary& state) {
+  const std::shared_ptr<TarnReportingSession> owner = session();
+  plist::Dictionary payload = payloadOf(state);
+  if (owner && !payload.empty()) {
+    owner->sendMessage(std::make_shared<TarnReportingSessionMessage>(std::move(payload), AudioEventCategory::Setup,
+                                                                     AudioEventType::Setup));
+  }
 }
 
 void TarnReportingSessionSystemMonitorWorker::stop() {

@@ -14,6 +14,7 @@
 #include <vector>
 
 #include "derived/TarnReportingSystemMonitorDictionary.h"
+#include "plist/Dictionary.h"
 #include "session/TarnReportingSessionWorker.h"
 
 namespace tarn {
@@ -34,6 +35,9 @@ class TarnReportingSessionSystemMonitorWorker : public TarnReportingSessionWorke
 
   // Sends the settings that are known and observes them all; always true.
   bool start();
+  // Sends a setting's state into the session; nothing when the state is empty. A state that says when it was read says
+  // so as "last_updated", and no longer how long the system was up.
+  void handleChange(const plist::Dictionary& state);
   // After it no message is sent.
   void stop();
 

@@ -73,13 +73,15 @@ Fields initialState(const TarnReportingSessionPreviousValues& previousValues) {
   state[Field::RingerState] = false;
   state[Field::Channels] = -1;
   state.merge(Fields(kKeys, previousValues));
+  // Output counts as not running before the first message: what ran before it yields no message of its own.
+  state[Field::Running] = {};
   return state;
 }
 
 class VolumeWalk {
  public:
-  VolumeWalk(const TarnReportingSessionPreviousValues& previousValues, std::string_view process,
-             double minimumPlaytime);
+  VolumeWalk(const TarnReportingSessionPreviousValues& previousValues, std::string_view process, double minimumPlaytime)
+      : process_(process), minimumPlaytime_(minimumPlaytime), state_(initialState(previousValues)) {}
   void take(const plist::Dictionary& payload);
   TarnReportingSessionMessages finish();
 
@@ -97,17 +99,6 @@ class VolumeWalk {
   TarnReportingSessionMessages derived_;
 };
 
-VolumeWalk::VolumeWalk(const TarnReportingSessionPreviousValues& previousValues, std::string_view process,
-                       double minimumPlaytime)
-    : process_(process), minimumPlaytime_(minimumPlaytime), state_(initialState(previousValues)) {
-  if (state_[Field::Running].asBool()) {
-    clock_.startAt(state_[Field::Timestamp]);
-    running_ = true;
-    // Without it the first message counts as not running before: what ran before it yields no message of its own.
-    state_[Field::Running] = {};
-  }
-}
-
 void VolumeWalk::take(const plist::Dictionary& payload) {
   const Fields message = reader_.read(payload);
   const plist::ValueView& time = message[Field::Timestamp];
@@ -119,7 +110,7 @@ void VolumeWalk::take(const plist::Dictionary& payload) {
     if (running_ && !wasRunning) {
       clock_.startAt(time);
     }
-    changed = changed || (!running_ && wasRunning);
+    changed = changed || !running_;
   } else {
     running_ = running_ && !hasEnd;
   }

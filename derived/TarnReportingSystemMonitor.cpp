@@ -1,7 +1,6 @@
 #include "derived/TarnReportingSystemMonitor.h"
 
 #include <array>
-#include <cmath>
 #include <mutex>
 #include <utility>
 
@@ -173,14 +172,10 @@ void TarnReportingSystemMonitor::listenForFeatureStateChanges() {
 }
 
 void TarnReportingSystemMonitor::listenForFeature(const plist::Key& name, const plist::Dictionary& description) {
-  const plist::ValueView notification = description.get(kNotification);
-  if (!notification.present()) {
-    return;
-  }
   // A handler that runs on another thread before the token is stored waits for it at the lock.
   const std::lock_guard guard(*systemMonitorDictionary_);
   const auto registration = TarnReportingFacilities().notifications.registerFor(
-      notification.text(), queue_, [weakSelf = weak_from_this(), name](std::int32_t token) {
+      description.get(kNotification).text(), queue_, [weakSelf = weak_from_this(), name](std::int32_t token) {
         if (const auto self = weakSelf.lock()) {
           self->featureChanged(name, token);
         }
@@ -214,8 +209,7 @@ plist::Dictionary TarnReportingSystemMonitor::getFeatureState(std::string_view n
   TarnReportingLog(TarnReportingServiceDelegateCategory(), LogLevel::Default, kModule, "getting feature %@", name);
   const plist::Dictionary features = this->features();
   const plist::ValueView description = features.get(name);
-  if (name.empty() || description.kind() != plist::Kind::Dictionary ||
-      !description.dictionary().contains(kFeatureDomain)) {
+  if (description.kind() != plist::Kind::Dictionary) {
     return {};
   }
   const plist::Value value = readFeature(name, description.dictionary());
@@ -225,7 +219,7 @@ plist::Dictionary TarnReportingSystemMonitor::getFeatureState(std::string_view n
   const platform::Clock& clock = TarnReportingFacilities().clock;
   return {{name, value},
           {kTimestamp, clock.epochSeconds()},
-          {kSystemUptime, static_cast<std::int64_t>(std::trunc(clock.systemUptimeSeconds()))}};
+          {kSystemUptime, static_cast<std::int64_t>(clock.systemUptimeSeconds())}};
 }
 
 plist::Dictionary TarnReportingSystemMonitor::features() const {

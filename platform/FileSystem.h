@@ -17,10 +17,11 @@ namespace tarn::platform {
 class WritableFile {
  public:
   virtual ~WritableFile() = default;
-  // Appends the bytes. Some may be held back until close(), so an error may belong to an earlier write; what reached
-  // the file before stays there.
+  // Appends the bytes. They are in the file when it returns; after an error some may be. Each call goes to the disk by
+  // itself, so whoever has many small pieces joins them.
   [[nodiscard]] virtual MaybeError write(std::string_view bytes) = 0;
-  // Writes what is held back and closes. The file is closed afterwards, whatever the result; later calls fail.
+  // Closes; an error may belong to an earlier write, which the disk carried out later. The file is closed afterwards,
+  // whatever the result; later calls fail.
   [[nodiscard]] virtual MaybeError close() = 0;
 };
 

@@ -33,34 +33,26 @@ MaybeError writeAll(int descriptor, std::string_view bytes) {
   return {};
 }
 
-// Lines are short and many; they reach the disk in blocks.
-class BlockFile final : public platform::WritableFile {
+// Holds nothing back: a disk that is full says so to the write that it refuses.
+class OpenFile final : public platform::WritableFile {
  public:
-  explicit BlockFile(int descriptor) : descriptor_(descriptor) {}
-  ~BlockFile() override { static_cast<void>(close()); }
-  BlockFile(const BlockFile&) = delete;
-  BlockFile& operator=(const BlockFile&) = delete;
+  explicit OpenFile(int descriptor) : descriptor_(descriptor) {}
+  ~OpenFile() override { static_cast<void>(close()); }
+  OpenFile(const OpenFile&) = delete;
+  OpenFile& operator=(const OpenFile&) = delete;
 
   MaybeError write(std::string_view bytes) override {
-    if (descriptor_ < 0) return systemError(EBADF);
-    heldBack_.append(bytes);
-    return heldBack_.size() < kBlockBytes ? MaybeError() : flush();
+    return descriptor_ < 0 ? systemError(EBADF) : writeAll(descriptor_, bytes);
   }
 
   MaybeError close() override {
     if (descriptor_ < 0) return systemError(EBADF);
-    auto error = flush();
     // A disk that is written to later reports its failure here.
-    if (::close(std::exchange(descriptor_, -1)) != 0 && !error) error = lastSystemError();
-    return error;
+    return ::close(std::exchange(descriptor_, -1)) == 0 ? MaybeError() : lastSystemError();
   }
 
  private:
-  // What could not be written is dropped: written again behind a gap it would be worse than missing.
-  MaybeError flush() { return writeAll(descriptor_, std::exchange(heldBack_, {})); }
-
   int descriptor_;  // -1 once closed
-  std::string heldBack_;
 };
 
 MaybeError createDirectory(const std::string& path, mode_t permissions) {
@@ -130,7 +122,7 @@ MaybeError LinuxFileSystem::createFile(std::string_view path) {
 Outcome<std::unique_ptr<platform::WritableFile>> LinuxFileSystem::openForWriting(std::string_view path) {
   const int file = ::open(std::string(path).c_str(), O_WRONLY | O_TRUNC | O_CLOEXEC);
   if (file < 0) return {nullptr, lastSystemError()};
-  return {std::make_unique<BlockFile>(file), {}};
+  return {std::make_unique<OpenFile>(file), {}};
 }
 
 Outcome<std::string> LinuxFileSystem::readFile(std::string_view path, std::size_t mostBytes) {

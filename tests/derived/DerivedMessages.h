@@ -6,6 +6,7 @@
 #include <utility>
 #include <vector>
 
+#include "platform/testing/FakePlatform.h"
 #include "plist/Dictionary.h"
 #include "session/TarnReportingSessionMessage.h"
 #include "session/TarnReportingSessionPreviousValues.h"
@@ -50,5 +51,16 @@ inline std::vector<std::string> rows(const TarnReportingSessionMessages& message
 }
 
 using Rows = std::vector<std::string>;
+
+// How many segments were looked at, whether or not a message came of them: each is one line of the log.
+inline std::size_t segmentsLookedAt(const FakePlatform& platform) {
+  std::size_t count = 0;
+  for (const std::string& line : platform.log.messages()) {
+    if (line.starts_with("playingTime {") || line.starts_with("runningTime {")) {
+      ++count;
+    }
+  }
+  return count;
+}
 
 }  // namespace tarn::testing

@@ -159,6 +159,46 @@ TEST_F(DerivingWorkers, ValuesThatAPeriodLeftBehindStartTheNext) {
   EXPECT_EQ(sent[0].get("active_devices").text(), "Headphones");
 }
 
+TEST_F(DerivingWorkers, InputThatAPeriodDescribedIsToldInTheNext) {
+  const auto session = startSession<TarnReportingSessionInputMessagesWorker>();
+  send(*session, {{"vp_config_input_port", "mic"}});
+  session->stop();
+  session->start();
+  send(*session, {{"session_input_running", true}});
+  send(*session, {{"session_input_running", false}});
+  session->stop();
+  ASSERT_EQ(summaries("Input").size(), 1U);
+  EXPECT_EQ(summaries("Input")[0].get("vp_config_input_port").text(), "mic");
+}
+
+TEST_F(DerivingWorkers, GroupThatAPeriodJoinedHoldsInTheNext) {
+  const auto session = startSession<TarnReportingSessionLagoonMessagesWorker>();
+  send(*session, {{"lagoon_session", 1}, {"mFormatID", "aac"}});
+  session->stop();
+  session->start();
+  send(*session, {{"session_output_running", true}});
+  send(*session, {{"session_output_running", false}});
+  session->stop();
+  ASSERT_EQ(summaries("Lagoon").size(), 1U);
+  EXPECT_EQ(summaries("Lagoon")[0].get("mFormatID").text(), "aac");
+}
+
+TEST_F(DerivingWorkers, HalfASecondIsTooShortForEveryWorker) {
+  const auto session = startSession<TarnReportingSessionVolumeMessagesWorker, TarnReportingSessionLagoonMessagesWorker,
+                                    TarnReportingSessionInputMessagesWorker>();
+  const double begin = now();
+  session->sendMessage(at(begin, {{"session_output_running", true},
+                                  {"session_input_running", true},
+                                  {"lagoon_session", 1},
+                                  {"KvSessionVolume", 0.5}}));
+  session->sendMessage(at(begin + 0.5, {{"session_output_running", false}, {"session_input_running", false}}));
+  session->stop();
+  for (const char* category : {"Volume", "Lagoon", "Input"}) {
+    EXPECT_TRUE(summaries(category).empty()) << category;
+  }
+  EXPECT_EQ(segmentsLookedAt(platform_), 3U);
+}
+
 TEST_F(DerivingWorkers, LastValuesOfThePeriodItselfStartTheWalk) {
   // Known before the first message already, although the volume is only told after output ran.
   const auto session = startSession<TarnReportingSessionVolumeMessagesWorker>();

@@ -57,6 +57,35 @@ TEST_F(CreateInputMessages, CodecWithRateZeroIsNeverListed) {
   EXPECT_EQ(rows(create({start(0), codec(10, "opus", 0.5), end(60)}), kColumns), (Rows{"60 (null) 1 1"}));
 }
 
+TEST_F(CreateInputMessages, CodecWithARateThatOnlyLooksLikeZeroIsListed) {
+  const auto vocoders = [](const plist::ValueView& rate) {
+    return rows(create({start(0), codec(10, "opus", rate), end(60)}), {"vocoders"});
+  };
+  EXPECT_EQ(vocoders("08.0"), (Rows{"opus:08.0"}));
+  EXPECT_EQ(vocoders("0"), (Rows{"opus:0"}));
+  EXPECT_EQ(vocoders(0), (Rows{"opus:0"}));
+  EXPECT_EQ(vocoders(" 0.0"), (Rows{"opus: 0.0"}));
+  EXPECT_EQ(vocoders("10.0"), (Rows{"opus:10.0"}));
+}
+
+TEST_F(CreateInputMessages, CodecIsUnknownBeforeItIsTold) {
+  EXPECT_EQ(rows(create({start(0), codec(10, "unknown", "8000.0"), end(60)}), kColumns), (Rows{"60 (null) 1 1"}));
+}
+
+TEST_F(CreateInputMessages, DevicesAreUnknownBeforeTheyAreTold) {
+  EXPECT_EQ(rows(create({start(0), at(10, {{"active_devices", "unknown"}}), end(60)}), kColumns),
+            (Rows{"60 (null) 1 1"}));
+}
+
+TEST_F(CreateInputMessages, PreviousValuesFillTheState) {
+  const auto derived = create({start(0), end(10)}, {{"active_devices", "Headset"},
+                                                    {"vp_config_operation_mode", "wide"},
+                                                    {"vp_config_input_port", "mic"},
+                                                    {"other", 1}});
+  EXPECT_EQ(rows(derived, {"active_devices", "vp_config_operation_mode", "vp_config_input_port"}),
+            (Rows{"Headset wide mic"}));
+}
+
 TEST_F(CreateInputMessages, CodecsAreSortedAndListedOnce) {
   EXPECT_EQ(rows(create({start(0), codec(10, "opus", "16000.0"), codec(20, "amr", "8000.0"),
                          codec(30, "opus", "16000.0"), end(60)}),
@@ -81,6 +110,26 @@ TEST_F(CreateInputMessages, HalfASecondYieldsNothingAndItsCodecsCountForTheNextM
 
 TEST_F(CreateInputMessages, SessionDurationEndsTheSegment) {
   EXPECT_EQ(rows(create({start(0), at(10, {{"session_duration", 10.0}})}), kColumns), (Rows{"10 (null) 1 1"}));
+  // Input has ended with it: neither the device nor the late stop starts or ends anything.
+  EXPECT_EQ(
+      rows(create({start(0), at(10, {{"session_duration", 10.0}}), at(20, {{"active_devices", "Headset"}}), end(30)}),
+           kColumns),
+      (Rows{"10 (null) 1 1"}));
+}
+
+TEST_F(CreateInputMessages, RunningToldAgainIsNoStart) {
+  EXPECT_EQ(rows(create({start(0), start(20), end(30)}), kColumns), (Rows{"30 (null) 1 1"}));
+}
+
+TEST_F(CreateInputMessages, DifferencesSeenWhileNotRunningAreNoSegment) {
+  // The running state still says that input runs; the session's end says that it doesn't.
+  create({start(0), at(10, {{"session_duration", 10.0}}), at(20, {{"active_devices", "Headset"}})});
+  EXPECT_EQ(segmentsLookedAt(platform_), 1U);
+}
+
+TEST_F(CreateInputMessages, EndsWithoutRunningInputAreNoSegment) {
+  create({end(0), end(10), at(20, {{"session_duration", 20.0}}), start(30, {{"session_duration", 30.0}})});
+  EXPECT_EQ(segmentsLookedAt(platform_), 0U);
 }
 
 TEST_F(CreateInputMessages, SessionDurationInARunningMessageCutsAndGoesOn) {
@@ -159,6 +208,14 @@ TEST_F(CreateInputMessages, SpatialSettingsWithinTwoSecondsAreFolded) {
             (Rows{"5", "2", "3"}));
 }
 
+TEST_F(CreateInputMessages, MessageOfBothSpatialSettingsIsFiledUnderTheAccessory) {
+  const TarnReportingSessionMessages messages{
+      start(0), at(5, {{"spatial-audio-accessory-feature", true}, {"spatializationEnabled", true}}),
+      at(6, {{"spatializationEnabled", false}}), end(10)};
+  create(messages);
+  EXPECT_FALSE(messages[1]->message().get("spatializationEnabled").asBool());
+}
+
 TEST_F(CreateInputMessages, ValuesOfTheWrongKindAreReadAsConverted) {
   EXPECT_EQ(rows(create({stamped("0", {{"session_input_running", "1"}}), codec(1, 7, 16000.0),
                          codec(2, "bare", plist::ValueView()), at(10, {{"session_input_running", "no"}})}),
@@ -171,6 +228,7 @@ TEST_F(CreateInputMessages, ValuesOfTheWrongKindAreReadAsConverted) {
 
 TEST_F(CreateInputMessages, SegmentsWithoutATimeOrAStartAreSkipped) {
   EXPECT_TRUE(create({start(0), unstamped({{"session_input_running", false}})}).empty());
+  EXPECT_TRUE(create({start(-10), unstamped({{"session_input_running", false}})}).empty());
   EXPECT_TRUE(create({unstamped({{"session_input_running", true}}), end(10)}).empty());
 }
 

@@ -1,6 +1,7 @@
 #include <gtest/gtest.h>
 
 #include <cmath>
+#include <utility>
 
 #include "derived/TarnReportingSessionLagoonMessagesWorker.h"
 #include "platform/testing/FakePlatform.h"
@@ -15,8 +16,10 @@ using namespace testing;
 class CreateLagoonMessages : public ::testing::Test {
  protected:
   static TarnReportingSessionMessages create(const TarnReportingSessionMessages& messages,
-                                             const plist::Dictionary& previousValues = {}) {
-    return TarnReportingSessionLagoonMessagesWorker::createLagoonMessages(messages, previous(previousValues), 0.5);
+                                             const plist::Dictionary& previousValues = {},
+                                             double minimumPlaytime = 0.5) {
+    return TarnReportingSessionLagoonMessagesWorker::createLagoonMessages(messages, previous(previousValues),
+                                                                          minimumPlaytime);
   }
   // Output starts inside a group session.
   static std::shared_ptr<TarnReportingSessionMessage> start(double time, plist::Dictionary more = {}) {
@@ -107,8 +110,46 @@ TEST_F(CreateLagoonMessages, JoiningAGroupWhilePlayingStartsTheSegment) {
 }
 
 TEST_F(CreateLagoonMessages, SegmentThatEndsWithTheGroupUnsetBeforeItIsSkipped) {
-  // The last message both joins and ends: the state before it isn't in a group.
-  EXPECT_TRUE(create({at(0, {{"session_output_running", true}}), start(40, {{"session_duration", 1}})}).empty());
+  // The last message both joins and ends, so its segment has no length, and the state before it isn't in a group. A
+  // minimum below zero takes every length.
+  const auto playing = at(0, {{"session_output_running", true}});
+  EXPECT_TRUE(create({playing, start(40, {{"session_duration", 1}})}, {}, -1).empty());
+  EXPECT_EQ(segmentsLookedAt(platform_), 1U);
+  EXPECT_EQ(rows(create({playing, start(40, {{"session_duration", 1}})}, {{"lagoon_session", 1}}, -1), kColumns),
+            (Rows{"40 1 1"}));
+}
+
+TEST_F(CreateLagoonMessages, GroupWithoutOutputYieldsNothing) {
+  EXPECT_TRUE(create({at(0, {{"lagoon_session", 1}}), end(100)}).empty());
+  EXPECT_EQ(segmentsLookedAt(platform_), 0U);
+}
+
+TEST_F(CreateLagoonMessages, JoiningAGroupIsNoEndOfASegment) {
+  const auto alone = at(0, {{"session_output_running", true}, {"lagoon_session", 0}});
+  EXPECT_EQ(rows(create({alone, at(40, {{"lagoon_session", 1}}), end(100)}), kColumns), (Rows{"60 1 1"}));
+  EXPECT_EQ(segmentsLookedAt(platform_), 1U);
+}
+
+TEST_F(CreateLagoonMessages, OutputStartInTheGroupIsNoEndOfASegment) {
+  const auto silent = at(0, {{"session_output_running", false}, {"lagoon_session", 1}});
+  EXPECT_EQ(rows(create({silent, at(40, {{"session_output_running", true}}), end(100)}), kColumns), (Rows{"60 1 1"}));
+  EXPECT_EQ(segmentsLookedAt(platform_), 1U);
+}
+
+TEST_F(CreateLagoonMessages, EndInTheStartingMessageEndsAlthoughOutputDidNotRun) {
+  EXPECT_EQ(rows(create({start(20, {{"session_duration", 1}}), start(30), end(40)}), kColumns), (Rows{"10 1 1"}));
+  EXPECT_TRUE(platform_.log.contains(LogLevel::Debug, "playingTime=0.000000, tarnTimestamp=20,"));
+}
+
+TEST_F(CreateLagoonMessages, SessionsEndTakesRunningAway) {
+  EXPECT_EQ(rows(create({start(0), end(100), at(110, {{"lagoon_session", 1}}), end(200)}), kColumns),
+            (Rows{"100 1 1"}));
+}
+
+TEST_F(CreateLagoonMessages, RejoiningTheGroupStartsAnew) {
+  EXPECT_EQ(
+      rows(create({start(0), at(40, {{"lagoon_session", 0}}), at(60, {{"lagoon_session", 1}}), end(100)}), kColumns),
+      (Rows{"40 1 2", "40 2 2"}));
 }
 
 TEST_F(CreateLagoonMessages, PlayingInAGroupBeforeTheFirstMessageCounts) {
@@ -117,10 +158,15 @@ TEST_F(CreateLagoonMessages, PlayingInAGroupBeforeTheFirstMessageCounts) {
   EXPECT_EQ(rows(create({end(100)}, playing), kColumns), (Rows{"90 1 1"}));
 }
 
+TEST_F(CreateLagoonMessages, PlayingWithoutAGroupBeforeTheFirstMessageStartsWithTheGroup) {
+  const plist::Dictionary playing{{"session_output_running", true}, {"tarnreporting_timestamp", 10.0}};
+  EXPECT_EQ(rows(create({at(40, {{"lagoon_session", 1}}), end(100)}, playing), kColumns), (Rows{"60 1 1"}));
+}
+
 TEST_F(CreateLagoonMessages, GroupFlagOfTheStateCountsWithoutAStart) {
   // In the group, but not playing: the message that starts output needs no flag of its own.
-  EXPECT_EQ(rows(create({at(20, {{"session_output_running", true}}), end(100)}, {{"lagoon_session", 1}}), kColumns),
-            (Rows{"80 1 1"}));
+  const plist::Dictionary inGroup{{"lagoon_session", 1}, {"tarnreporting_timestamp", 10.0}};
+  EXPECT_EQ(rows(create({at(20, {{"session_output_running", true}}), end(100)}, inGroup), kColumns), (Rows{"80 1 1"}));
 }
 
 TEST_F(CreateLagoonMessages, SessionsEndTakesTheGroupFlagAway) {
@@ -181,6 +227,73 @@ TEST_F(CreateLagoonMessages, LogsWhatItDoes) {
     EXPECT_EQ(entry.category, "tarnrr");
     EXPECT_EQ(entry.module, "TarnReportingSessionLagoonMessagesWorker");
   }
+}
+
+// The operations that the walk is made of.
+
+using Worker = TarnReportingSessionLagoonMessagesWorker;
+
+Worker::Fields fieldsOf(const plist::Dictionary& payload) {
+  return {Worker::fieldKeys(), payload};
+}
+
+bool watchedFieldChanges(const plist::Dictionary& message, const plist::Dictionary& previous) {
+  return Worker::watchedFieldChangeInMessage(fieldsOf(message), fieldsOf(previous));
+}
+
+TEST(LagoonOperations, FiveFieldsAreWatched) {
+  EXPECT_TRUE(watchedFieldChanges({{"session_output_running", true}}, {{"session_output_running", false}}));
+  EXPECT_TRUE(watchedFieldChanges({{"lagoon_session", 1}}, {{"lagoon_session", 2}}));
+  EXPECT_TRUE(watchedFieldChanges({{"mChannelsPerFrame", 1}}, {{"mChannelsPerFrame", 2}}));
+  EXPECT_TRUE(watchedFieldChanges({{"mFormatID", "a"}}, {{"mFormatID", "b"}}));
+  EXPECT_TRUE(watchedFieldChanges({{"active_devices", "a"}}, {{"active_devices", "b"}}));
+  EXPECT_FALSE(watchedFieldChanges({{"session_selected_format", "a"}}, {{"session_selected_format", "b"}}));
+  EXPECT_FALSE(watchedFieldChanges({{"tarnreporting_timestamp", 1}}, {{"tarnreporting_timestamp", 2}}));
+  EXPECT_FALSE(watchedFieldChanges({{"session_duration", 1}}, {{"session_duration", 2}}));
+}
+
+TEST(LagoonOperations, EqualValuesAreNoWatchedChange) {
+  const plist::Dictionary payload{{"session_output_running", true},
+                                  {"lagoon_session", 1},
+                                  {"mChannelsPerFrame", 2},
+                                  {"mFormatID", "a"},
+                                  {"active_devices", "b"}};
+  EXPECT_FALSE(watchedFieldChanges(payload, payload));
+}
+
+TEST(LagoonOperations, AValueMissingOnEitherSideIsNoChange) {
+  const plist::Dictionary none;
+  const plist::Dictionary one{{"mFormatID", "a"}, {"mChannelsPerFrame", 5}, {"session_output_running", true}};
+  for (const auto& [left, right] : {std::pair(none, one), std::pair(one, none), std::pair(none, none)}) {
+    EXPECT_FALSE(Worker::didStringChangeInKey(Worker::Field::FormatID, fieldsOf(left), fieldsOf(right)));
+    EXPECT_FALSE(Worker::didIntChangeInKey(Worker::Field::Channels, fieldsOf(left), fieldsOf(right)));
+    EXPECT_FALSE(Worker::didBoolChangeInKey(Worker::Field::Running, fieldsOf(left), fieldsOf(right)));
+  }
+}
+
+TEST(LagoonOperations, EachComparisonReadsItsType) {
+  const auto changes = [](auto operation, const plist::ValueView& left, const plist::ValueView& right) {
+    const plist::Dictionary leftPayload{{"mFormatID", left}};
+    const plist::Dictionary rightPayload{{"mFormatID", right}};
+    return operation(Worker::Field::FormatID, fieldsOf(leftPayload), fieldsOf(rightPayload));
+  };
+  EXPECT_TRUE(changes(Worker::didStringChangeInKey, "2", "2.0"));
+  EXPECT_FALSE(changes(Worker::didStringChangeInKey, "2", 2));
+  EXPECT_TRUE(changes(Worker::didIntChangeInKey, 2, 3));
+  EXPECT_FALSE(changes(Worker::didIntChangeInKey, 2, 2.75));
+  EXPECT_TRUE(changes(Worker::didBoolChangeInKey, 0, 3));
+  EXPECT_FALSE(changes(Worker::didBoolChangeInKey, 1, 3));
+}
+
+TEST(LagoonOperations, CoalescingTakesTheFirstThatHoldsTheValue) {
+  const plist::Dictionary first{{"mFormatID", "first"}};
+  const plist::Dictionary second{{"mFormatID", "second"}, {"active_devices", "second"}};
+  const Worker::Fields firstFields = fieldsOf(first);
+  const Worker::Fields secondFields = fieldsOf(second);
+  const auto coalesce = [&](Worker::Field key) { return Worker::coalesceKey(key, {&firstFields, &secondFields}); };
+  EXPECT_EQ(coalesce(Worker::Field::FormatID).asText(), "first");
+  EXPECT_EQ(coalesce(Worker::Field::ActiveDevices).asText(), "second");
+  EXPECT_FALSE(coalesce(Worker::Field::Channels).present());
 }
 
 }  // namespace

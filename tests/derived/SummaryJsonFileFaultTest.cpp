@@ -104,7 +104,7 @@ TEST_F(SummaryJsonFileFault, NextPeriodWritesItsFileAgain) {
 
 TEST_F(SummaryJsonFileFault, WriteThatFailsAtAnyPointIsLoggedOnceAndWhatWasWrittenStays) {
   const std::string whole = golden("without_the_misfit.json");
-  constexpr std::size_t kWrites = 18;  // "[", four objects, three commas, "]", each with its line end
+  constexpr std::size_t kWrites = 6;  // "[", four objects, "]": a message's lines are one write
   std::size_t longest = 0;
   for (std::size_t skip = 0; skip < kWrites; ++skip) {
     SCOPED_TRACE(skip);
@@ -117,12 +117,47 @@ TEST_F(SummaryJsonFileFault, WriteThatFailsAtAnyPointIsLoggedOnceAndWhatWasWritt
                                  " error=\"Input/output error\""}));
     const std::string content = contentOf(path);
     EXPECT_EQ(content, whole.substr(0, content.size()));
+    EXPECT_TRUE(skip == 0 || content == "[\n" || content.ends_with("\n}\n")) << content;
     EXPECT_LT(content.size(), whole.size());
     EXPECT_TRUE(skip == 0 || content.size() > longest);
     longest = content.size();
     expectEnded(*session);
     EXPECT_EQ(platform_.fileSystem.openFiles(), 0U);
   }
+}
+
+TEST_F(SummaryJsonFileFault, NextPeriodAfterAFailedWriteHasAWholeFile) {
+  platform_.fileSystem.failNext(Operation::Write, {5, "Input/output error"}, 2);
+  const auto session = makeTestSession();
+  play(*session);
+  platform_.clock.advance(std::chrono::seconds(1));
+  play(*session);
+  EXPECT_EQ(errors().size(), 1U);
+  const Strings names = memberNames(contentOf(pathOf("20240131-142502+0100-4711-Unknown-test.json")));
+  EXPECT_EQ(names, (Strings{"Setup_Start_1", "Playback_Start_1", "Playback_Start_2", "Setup_Stop_1"}));
+}
+
+TEST_F(SummaryJsonFileFault, WorkerIsStartedAgainWhenALaterFileOpens) {
+  platform_.fileSystem.failNext(Operation::OpenForWriting, {24, "Too many open files"});
+  const auto session = makeTestSession();
+  session->sendMessage(message({{"n", 1}}));
+  const auto worker = TarnReportingSessionSummaryJsonFileWorker::initWithSession(session);
+  worker->stop();
+  worker->stop();
+  EXPECT_TRUE(worker->started());
+}
+
+TEST_F(SummaryJsonFileFault, LastOfTheNumberedNamesIsUsedAndOneMoreIsAnError) {
+  platform_.fileSystem.putFile(pathOf(kName), "");
+  for (std::size_t number = 2; number < 10000; ++number) {
+    platform_.fileSystem.putFile(numbered(number), "");
+  }
+  play(*makeTestSession());
+  EXPECT_EQ(contentOf(numbered(10000)), golden("without_the_misfit.json"));
+  EXPECT_TRUE(errors().empty());
+  play(*makeTestSession());
+  EXPECT_EQ(errors(), (Strings{"SummaryJsonFileWorker failed to open file. action=open file=" + numbered(10000) +
+                               " error=\"File exists\""}));
 }
 
 TEST_F(SummaryJsonFileFault, FullDiskKeepsWhatFits) {

@@ -231,6 +231,40 @@ TEST_F(SystemMonitorWorker, ValuesOfAnyTypeArePassedOnAsTheyAre) {
   EXPECT_EQ(payloads[0][kAccessory].dictionary(), value);
 }
 
+// The worker of a session that sends what it is told to its consumer.
+class HandleChange : public SystemMonitorWorker {
+ protected:
+  static void handle(const plist::Dictionary& state) {
+    const auto session = makeSession();
+    session->start();
+    TarnReportingSessionSystemMonitorWorker::initWithSession(session)->handleChange(state);
+  }
+};
+
+TEST_F(HandleChange, StampBecomesLastUpdatedAndTheUptimeGoes) {
+  handle({{kRinger, true}, {"tarnreporting_timestamp", 1700000000.5}, {"systemuptime_sec", 99}});
+  EXPECT_EQ(received(), (Payloads{{{kRinger, true}, {"last_updated", 1700000000.5}}}));
+}
+
+TEST_F(HandleChange, StateWithoutAStampIsSentAsItIs) {
+  handle({{kRinger, true}, {"systemuptime_sec", 99}});
+  EXPECT_EQ(received(), (Payloads{{{kRinger, true}, {"systemuptime_sec", 99}}}));
+}
+
+TEST_F(HandleChange, EmptyStateSendsNothing) {
+  handle({});
+  EXPECT_TRUE(script().received.empty());
+}
+
+TEST_F(HandleChange, WithoutItsSessionItSendsNothing) {
+  auto session = makeSession();
+  session->start();
+  const auto worker = TarnReportingSessionSystemMonitorWorker::initWithSession(session);
+  session.reset();
+  worker->handleChange({{kRinger, true}});
+  EXPECT_TRUE(script().received.empty());
+}
+
 // Lets another thread take the dictionary's lock while it handles a message.
 class LockingWorker : public TarnReportingSessionWorkerProtocol, public TarnReportingSessionWorkerConsumerProtocol {
  public:

@@ -161,6 +161,7 @@ TEST_F(TarnReportingSystemMonitorTest, NotificationWithAnEqualStateChangesNothin
   start();
   observe(kAccessory);
   const plist::Dictionary before = state(kAccessory);
+  platform_.clock.setSystemUptimeSeconds(5000);
   platform_.advance(10s);
   post(kAccessoryChanged);
   EXPECT_EQ(state(kAccessory), before);
@@ -270,6 +271,11 @@ TEST_F(TarnReportingSystemMonitorTest, DefaultsReadTextAndBooleanOffOtherKinds) 
   platform_.defaults.set(kTarnkit, "disable_reporting", "1");
   EXPECT_EQ(TarnReportingSystemMonitor::TarnReportingDefaults(),
             (plist::Dictionary{{"device_name", "12"}, {"disable_reporting", true}}));
+}
+
+TEST_F(TarnReportingSystemMonitorTest, DefaultsLeaveOutADeviceNameThatIsNoText) {
+  platform_.defaults.set(kTarnkit, "device_name", plist::Dictionary{{"name", "Studio"}});
+  EXPECT_EQ(TarnReportingSystemMonitor::TarnReportingDefaults(), (plist::Dictionary{{"disable_reporting", 0}}));
 }
 
 TEST_F(TarnReportingSystemMonitorTest, InstanceKeepsTheDefaultsOfItsCreation) {

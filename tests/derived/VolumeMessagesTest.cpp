@@ -93,6 +93,29 @@ TEST_F(CreateVolumeMessages, SessionDurationEndsTheSegmentWithoutARunningKey) {
             (Rows{"10 0.5 1 1"}));
 }
 
+TEST_F(CreateVolumeMessages, SessionDurationInARunningMessageCutsAndGoesOn) {
+  EXPECT_EQ(
+      rows(create({start(0, {{"KvSessionVolume", 0.5}}), start(10, {{"session_duration", 10.0}}), end(15)}), kColumns),
+      (Rows{"10 0.5 1 2", "5 0.5 2 2"}));
+}
+
+TEST_F(CreateVolumeMessages, DifferencesSeenWhileNotRunningAreNoSegment) {
+  const plist::Dictionary differences{{"session_selected_format", "lpcm"},
+                                      {"active_devices", "Speaker"},
+                                      {"spatializationEnabled", true},
+                                      {"ringerstate", true},
+                                      {"KvSessionVolume", 0.75}};
+  // The running state still says that output runs; the session's end says that it doesn't.
+  create({start(0, {{"KvSessionVolume", 0.5}}), at(10, {{"session_duration", 10.0}}), at(20, differences)});
+  EXPECT_EQ(segmentsLookedAt(platform_), 1U);
+}
+
+TEST_F(CreateVolumeMessages, EndsWithoutRunningOutputAreNoSegment) {
+  create({end(0, {{"KvSessionVolume", 0.5}}), end(10), at(20, {{"session_duration", 20.0}}),
+          start(30, {{"session_duration", 30.0}})});
+  EXPECT_EQ(segmentsLookedAt(platform_), 0U);
+}
+
 TEST_F(CreateVolumeMessages, SpatialisationOnAndOffWithinFiveSecondsCollapses) {
   EXPECT_EQ(rows(create({start(0), at(1, {{"KvSessionVolume", 0.5}}),
                          at(10, {{"spatial-audio-accessory-feature", true}, {"spatializationEnabled", true}}),
@@ -213,6 +236,7 @@ TEST_F(CreateVolumeMessages, RunningMessageAfterOutputThatRanBeforeStartsAnew) {
 TEST_F(CreateVolumeMessages, SegmentsWithoutATimeOrAStartAreSkipped) {
   const plist::Dictionary volume{{"KvSessionVolume", 0.5}};
   EXPECT_TRUE(create({start(0), unstamped({{"session_output_running", false}})}, volume).empty());
+  EXPECT_TRUE(create({start(-10), unstamped({{"session_output_running", false}})}, volume).empty());
   EXPECT_TRUE(create({unstamped({{"session_output_running", true}}), end(10)}, volume).empty());
   // The skipped cut at no time leaves no start for the next segment.
   EXPECT_TRUE(create({start(0), unstamped({{"KvSessionVolume", 0.75}}), end(10)}, volume).empty());
