@@ -1,10 +1,26 @@
-// The defaults suite that switches the diagnostic workers on and tunes them.
+// TarnReportingDiagnosticDefaults: the defaults suite that switches the diagnostic workers on and tunes them.
+//
+// It reads and writes the platform's store at once and keeps nothing. Threads: any.
 #pragma once
 
 #include <string_view>
 
+#include "platform/DefaultsStore.h"
+#include "platform/Facilities.h"
+#include "service/TarnReportingPlatform.h"
+
 namespace tarn {
 
-inline constexpr std::string_view kTarnReportingDiagnosticSuite = "sys.oxbow.tarnkit.tarnreporting";
+class TarnReportingDiagnosticDefaults {
+ public:
+  static constexpr std::string_view kSuite = "sys.oxbow.tarnkit.tarnreporting";
+
+  // Absent when there is none.
+  plist::Value value(std::string_view key) const { return TarnReportingFacilities().defaults.value(kSuite, key); }
+  // Whether it is now stored.
+  [[nodiscard]] bool setValue(std::string_view key, const plist::ValueView& value) const {
+    return TarnReportingFacilities().defaults.setValue(kSuite, key, value);
+  }
+};
 
 }  // namespace tarn

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <array>
 #include <charconv>
+#include <cmath>
 #include <cstdint>
 #include <mutex>
 #include <optional>
@@ -80,10 +81,11 @@ void appendPart(std::string& key, std::string_view text) {
   }
 }
 
-// As %f writes it, whatever the locale.
+// As %f writes it, whatever the locale; not-a-number has no sign.
 void appendSixDecimals(std::string& out, double value) {
   std::array<char, 330> digits;  // the longest double has 309 digits before the point
-  const auto written = std::to_chars(digits.begin(), digits.end(), value, std::chars_format::fixed, 6);
+  const auto written = std::to_chars(digits.begin(), digits.end(), std::isnan(value) ? std::fabs(value) : value,
+                                     std::chars_format::fixed, 6);
   out.append(digits.data(), written.ptr);
 }
 

@@ -9,7 +9,6 @@
 #include "diagnostics/TarnReportingDiagnosticDefaults.h"
 #include "platform/Clock.h"
 #include "platform/Condition.h"
-#include "platform/DefaultsStore.h"
 #include "platform/Facilities.h"
 #include "platform/GyreService.h"
 #include "platform/NotificationCenter.h"
@@ -65,7 +64,7 @@ std::int32_t ioCycle(const plist::Dictionary& payload) {
 }
 
 plist::Value loggedSetting(std::string_view key) {
-  plist::Value value = TarnReportingFacilities().defaults.value(kTarnReportingDiagnosticSuite, key);
+  plist::Value value = TarnReportingSessionDPWorker::getUserDefaults().value(key);
   if (value.present()) {
     log(LogLevel::Debug, "Value of %@ is %@", key, value);
   }
@@ -114,6 +113,11 @@ std::unique_ptr<TarnReportingSessionDPWorker> TarnReportingSessionDPWorker::init
   settings.waitMicroseconds = getDoubleRunTimeDefaults("wait_time");
   runTimeSettings() = settings;
   return std::make_unique<TarnReportingSessionDPWorker>(session);
+}
+
+const TarnReportingDiagnosticDefaults& TarnReportingSessionDPWorker::getUserDefaults() {
+  static const TarnReportingDiagnosticDefaults kDefaults;
+  return kDefaults;
 }
 
 bool TarnReportingSessionDPWorker::getEnableFlag(std::string_view key) {

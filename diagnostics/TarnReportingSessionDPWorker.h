@@ -19,6 +19,8 @@
 
 namespace tarn {
 
+class TarnReportingDiagnosticDefaults;
+
 namespace plist {
 class Dictionary;
 }
@@ -36,13 +38,17 @@ class TarnReportingSessionDPWorker : public TarnReportingSessionWorkerProtocol,
 
   bool start() { return true; }
   void handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) override;
-
- private:
+  // Whether the message is an overload; logs a yes.
   static bool interestedInMessage(const TarnReportingSessionMessage& message);
-  // A setting of the suite; false or 0 without one.
+
+  // The suite of the settings, one for the process.
+  static const TarnReportingDiagnosticDefaults& getUserDefaults();
+  // A setting of the suite, logged when there is one; false or 0 without.
   static bool getEnableFlag(std::string_view key);
   static std::int32_t getRunTimeDefaults(std::string_view key);
   static double getDoubleRunTimeDefaults(std::string_view key);
+
+ private:
   // Whether the overload counts and its moment allows a request.
   bool meetsConditions(const plist::Dictionary& payload, double now) const;
   static void dropGyre(const plist::Dictionary& payload);

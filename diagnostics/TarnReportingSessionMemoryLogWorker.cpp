@@ -27,6 +27,8 @@ using Worker = TarnReportingSessionMemoryLogWorker;
 constexpr std::string_view kTag = "wiredlog:";
 constexpr std::size_t kLineBytes = 2047;
 constexpr std::size_t kBlockBytes = 512;
+// What a log entry holds beside its head.
+constexpr std::size_t kEntryBytes = kTarnReportingMostLogBytes - 64;
 
 bool holds(std::string_view line, std::string_view part) {
   return line.find(part) != std::string_view::npos;
@@ -151,18 +153,35 @@ std::string textOf(ToolRun& run, const Tool& tool, std::chrono::nanoseconds dead
 
 // How long the next block is: it ends with the first line that ends behind the least size.
 std::size_t blockLength(std::string_view text) {
-  if (text.size() < kBlockBytes) {
-    return text.size();
-  }
   const std::size_t newline = text.find('\n', kBlockBytes);
-  return newline == std::string_view::npos ? kBlockBytes : newline + 1;
+  return newline == std::string_view::npos ? std::min(kBlockBytes, text.size()) : newline + 1;
 }
 
-// A log takes entries of limited size only, so a long text goes there in pieces.
+// How much of the block the next entry takes; it doesn't end inside a character, as far as these are characters.
+std::size_t pieceLength(std::string_view block) {
+  constexpr std::size_t kLongestCharacter = 4;
+  std::size_t length = std::min(kEntryBytes, block.size());
+  while (length < block.size() && length > kEntryBytes - kLongestCharacter &&
+         (static_cast<unsigned char>(block[length]) & 0xC0U) == 0x80U) {
+    --length;
+  }
+  return length;
+}
+
+// The log cuts an entry that is too long, so a block that a very long line made goes there in several entries, all
+// under the block's number: what stands behind their heads is the block.
+void logBlock(std::size_t number, std::string_view block) {
+  while (!block.empty()) {
+    const std::string_view piece = block.substr(0, pieceLength(block));
+    log("WIRED LOG BLOCK %zu\n%s", number, piece);
+    block.remove_prefix(piece.size());
+  }
+}
+
 void logInBlocks(std::string_view text) {
   for (std::size_t number = 1; !text.empty(); ++number) {
     const std::size_t length = blockLength(text);
-    log("WIRED LOG BLOCK %zu\n%s", number, text.substr(0, length));
+    logBlock(number, text.substr(0, length));
     text.remove_prefix(length);
   }
 }

@@ -8,8 +8,9 @@
 // waits for the server queue in turn, and as that is one thread, no more than one request runs at a time.
 //
 // Bounds: a tool is ended after kToolTimeLimit, what it printed until then counts. No more than kMostBytesRead of its
-// output are read and about kMostBytesKept kept; an error line tells when there was more. A tool that didn't come to
-// its end within kPatience, as the platform's threads were busy, is left alone with an error line.
+// output are read and about kMostBytesKept kept; an error line tells when there was more. A block that a very long line
+// makes longer than a log entry may be is several entries of one number. A tool that didn't come to its end within
+// kPatience, as the platform's threads were busy, is left alone with an error line.
 #pragma once
 
 #include <chrono>

@@ -1,6 +1,5 @@
 #include "diagnostics/TarnReportingSessionSnareWorker.h"
 
-#include "diagnostics/TarnReportingSnareProcessState.h"
 #include "diagnostics/TarnReportingSnareWorkerInstanceAlarmLowRMS.h"
 #include "diagnostics/TarnReportingSnareWorkerInstanceHapticLeaks.h"
 #include "diagnostics/TarnReportingSnareWorkerInstanceMurmurDestroyRecordQueue.h"
@@ -37,7 +36,6 @@ std::unique_ptr<TarnReportingSessionSnareWorker> TarnReportingSessionSnareWorker
     return nullptr;
   }
   auto worker = std::make_unique<TarnReportingSessionSnareWorker>(session);
-  TarnReportingSnareProcessState::shared();
   if (facilities.deviceProperties.boolean(kHapticsCapability).value_or(false)) {
     worker->addInstance(InstanceClass::of<TarnReportingSnareWorkerInstanceHapticLeaks>());
   }

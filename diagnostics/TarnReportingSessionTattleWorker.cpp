@@ -7,7 +7,6 @@
 
 #include "diagnostics/TarnReportingDiagnosticDefaults.h"
 #include "platform/Clock.h"
-#include "platform/DefaultsStore.h"
 #include "platform/Facilities.h"
 #include "plist/Value.h"
 #include "service/TarnReportingLog.h"
@@ -49,7 +48,7 @@ std::unique_ptr<TarnReportingSessionTattleWorker> TarnReportingSessionTattleWork
   if (facilities.tattle == nullptr || !TarnReportingUtilityIsInternalBuild()) {
     return nullptr;
   }
-  const plist::Value backOff = facilities.defaults.value(kTarnReportingDiagnosticSuite, kBackOffKey);
+  const plist::Value backOff = TarnReportingDiagnosticDefaults().value(kBackOffKey);
   if (!backOff.present()) {
     log(LogLevel::Debug, "%@ default not set. Skipping worker. reporterID=%lli", kBackOffKey, session->reporterID());
     return nullptr;
@@ -62,16 +61,16 @@ TarnReportingSessionTattleWorker::TarnReportingSessionTattleWorker(std::weak_ptr
     : TarnReportingSessionWorkerProtocol(std::move(session)), backOffTime_(backOffTime) {}
 
 bool TarnReportingSessionTattleWorker::hasRunInTimeframe(double backOffSeconds, std::string_view defaultsKey) {
-  const platform::Facilities& facilities = TarnReportingFacilities();
-  const double now = facilities.clock.epochSeconds();
-  const plist::Value lastRun = facilities.defaults.value(kTarnReportingDiagnosticSuite, defaultsKey);
+  const TarnReportingDiagnosticDefaults defaults;
+  const double now = TarnReportingFacilities().clock.epochSeconds();
+  const plist::Value lastRun = defaults.value(defaultsKey);
   if (lastRun.present() && lastRun.view().asDouble() > now - backOffSeconds) {
     log(LogLevel::Debug, "Tattle has run. key=%@ lastRun=%@", defaultsKey, lastRun);
     return true;
   }
   log(LogLevel::Debug, "Tattle has not run. key=%@ backoffSeconds=%f", defaultsKey, backOffSeconds);
   // The store logs when it can't write. The prompt is shown all the same, as one in a run is the most there will be.
-  static_cast<void>(facilities.defaults.setValue(kTarnReportingDiagnosticSuite, defaultsKey, now));
+  static_cast<void>(defaults.setValue(defaultsKey, now));
   return false;
 }
 

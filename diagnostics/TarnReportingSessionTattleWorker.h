@@ -31,7 +31,6 @@ class TarnReportingSessionTattleWorker : public TarnReportingSessionWorkerProtoc
   // The next run of the session may prompt again.
   void stop();
 
- private:
   // Whether the message asks for a prompt. A yes has claimed the back-off period already.
   bool interestedInMessage(const TarnReportingSessionMessage& message);
   // Whether the last run, kept under `defaultsKey`, is less than so many seconds ago. If not, now is stored as the
@@ -39,6 +38,11 @@ class TarnReportingSessionTattleWorker : public TarnReportingSessionWorkerProtoc
   static bool hasRunInTimeframe(double backOffSeconds, std::string_view defaultsKey);
   static platform::TattleDraft docketDraftForParleyXYerror();
 
+  double backOffTime() const noexcept { return backOffTime_; }
+  bool hasRun() const noexcept { return hasRun_; }
+  double minimumMessageTime() const noexcept { return minimumMessageTime_; }
+
+ private:
   const double backOffTime_;
   bool hasRun_ = false;             // whether this run of the session has prompted
   double minimumMessageTime_ = -1;  // epoch seconds; not above 0 until the first message sets it

@@ -20,14 +20,14 @@ void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
 
 void logReason(std::int64_t code) {
   constexpr auto kReasons = static_cast<std::int64_t>(platform::kSnareReasonNames.size());
-  if (code == static_cast<std::int64_t>(platform::SnareReason::None)) {
-    log(LogLevel::Error, "Failed starting snare session. reason=kAilmentErrorNone");
-  } else if (code > 0 && code < kReasons) {
-    log(LogLevel::Info, "Failed starting snare session. reason=kAilmentError%@",
-        platform::kSnareReasonNames[static_cast<std::size_t>(code)]);
-  } else {
+  if (code < 0 || code >= kReasons) {
     log(LogLevel::Info, "Failed starting snare session. reason=%d", code);
+    return;
   }
+  // A failure without a reason is the service's own fault.
+  const bool isNone = code == static_cast<std::int64_t>(platform::SnareReason::None);
+  log(isNone ? LogLevel::Error : LogLevel::Info, "Failed starting snare session. reason=kAilmentError%@",
+      platform::kSnareReasonNames[static_cast<std::size_t>(code)]);
 }
 
 }  // namespace

@@ -10,7 +10,7 @@
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   using namespace tarn::linux_host;
   const std::string_view text(reinterpret_cast<const char*>(data), size);
-  const JsonReading reading = readJson(text);
+  const JsonReading reading = readJson(text, kMaximumJsonNesting, JsonNull::Absent);
   if (reading.fault) {
     if (reading.value.present() || reading.fault->line == 0 || reading.fault->column == 0 ||
         reading.fault->column > size + 1 || reading.fault->text.empty()) {

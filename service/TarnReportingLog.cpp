@@ -1,6 +1,7 @@
 #include "service/TarnReportingLog.h"
 
 #include <charconv>
+#include <cmath>
 #include <cstdio>
 #include <string>
 
@@ -14,9 +15,6 @@ namespace {
 constexpr std::size_t kModuleWidth = 25;
 constexpr std::size_t kLineWidth = 5;
 constexpr std::string_view kSubsystem = "sys.oxbow.tarnkit";
-// Texts hold what clients send. One that is longer is cut and tells so, or a client could have megabytes written with
-// each of its requests.
-constexpr std::size_t kMaxLineBytes = 65536;
 
 void appendPrefix(std::string& out, std::string_view module, int line) {
   if (module.size() < kModuleWidth) {
@@ -43,7 +41,7 @@ void appendHexadecimal(std::string& out, const LogArgument& argument) {
 
 void appendSixDecimals(std::string& out, double value) {
   char digits[330];  // the longest double has 309 digits before the point
-  const int length = std::snprintf(digits, sizeof digits, "%f", value);
+  const int length = std::snprintf(digits, sizeof digits, "%f", std::isnan(value) ? std::fabs(value) : value);
   out.append(digits, static_cast<std::size_t>(length));
 }
 
@@ -100,10 +98,10 @@ void appendFormatted(std::string& out, std::string_view format, std::initializer
 }
 
 void shorten(std::string& line) {
-  if (line.size() <= kMaxLineBytes) {
+  if (line.size() <= kTarnReportingMostLogBytes) {
     return;
   }
-  std::size_t end = kMaxLineBytes;
+  std::size_t end = kTarnReportingMostLogBytes;
   while ((static_cast<unsigned char>(line[end]) & 0xC0U) == 0x80U) {  // not inside a character
     --end;
   }

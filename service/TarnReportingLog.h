@@ -14,6 +14,7 @@
 #pragma once
 
 #include <concepts>
+#include <cstddef>
 #include <cstdint>
 #include <initializer_list>
 #include <optional>
@@ -28,6 +29,10 @@
 namespace tarn {
 
 using platform::LogLevel;
+
+// Texts hold what clients send. One that is longer is cut and tells so, or a client could have megabytes written with
+// each of its requests.
+inline constexpr std::size_t kTarnReportingMostLogBytes = 65536;
 
 // The text of a log line together with the line where it stands.
 struct LogText {

@@ -68,7 +68,6 @@ namespace {
 using namespace linux_host;
 
 constexpr std::string_view kModule = "main";
-constexpr const char* kSoundHardware = "/proc/asound";
 // For how long the end waits for the workers' own queues without seeing them get shorter.
 constexpr std::chrono::milliseconds kSettleTime{500};
 
@@ -146,7 +145,7 @@ class Host final : public platform::ProcessControl {
         notifications_(setup.options.stateDirectory + "/notifications", log),
         fileSystem_(directoriesOf(setup)),
         flumeFiles_(flumeFolderOf(setup), log),
-        alsaFlume_(kSoundHardware, log, clock),
+        flume_(flumeSources(setup, log, clock)),
         signposts_(clock),
         tracePoints_(signposts_),
         performanceTrace_({signposts_, fileSystem_, clock, processFacts_, log}),
@@ -241,6 +240,15 @@ class Host final : public platform::ProcessControl {
     }
   }
 
+  // Makes the source that only some devices have.
+  std::vector<FlumeSource*> flumeSources(const Setup& setup, platform::Log& log, const platform::Clock& clock) {
+    std::vector<FlumeSource*> sources{&flumeFiles_};
+    if (const std::optional<std::string>& tree = setup.configuration.paths.alsa) {
+      sources.push_back(&alsaFlume_.emplace(*tree, log, clock));
+    }
+    return sources;
+  }
+
   platform::Log& log_;
   const std::shared_ptr<SignalSource> signals_;
   MainLoop loop_;
@@ -261,8 +269,8 @@ class Host final : public platform::ProcessControl {
   LinuxProcessFacts processFacts_;
   LinuxFileSystem fileSystem_;
   FlumeFiles flumeFiles_;
-  AlsaFlume alsaFlume_;
-  LinuxFlumeService flume_{{&flumeFiles_, &alsaFlume_}};
+  std::optional<AlsaFlume> alsaFlume_;  // of a device that is told where its sound hardware is
+  LinuxFlumeService flume_;
   LinuxSignposts signposts_;
   LinuxTracePoints tracePoints_;
   LinuxPerformanceTraceService performanceTrace_;

@@ -1,5 +1,5 @@
 // AlsaFlume: what the machine's own sound hardware counts, as driver report channels. It reads the kernel's texts under
-// /proc/asound (see AlsaText) and nothing else; no sound device is opened.
+// one folder, /proc/asound on a real device (see AlsaText), and nothing else; no sound device is opened.
 //
 // A sound card is a driver, under its id. Each PCM substream has three channels, in the sub-group "pcm0p" (device and
 // direction) of one of three groups:
@@ -43,7 +43,6 @@ class AlsaFlume final : public FlumeSource {
   static constexpr std::size_t kMostCards = 32;  // as many as the kernel has
   static constexpr std::size_t kMostSubstreams = 256;
 
-  // The folder is /proc/asound, or a test's.
   AlsaFlume(std::string folder, platform::Log& log, const platform::Clock& clock);
   AlsaFlume(const AlsaFlume&) = delete;
   AlsaFlume& operator=(const AlsaFlume&) = delete;

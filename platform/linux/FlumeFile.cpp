@@ -198,7 +198,7 @@ FlumeFileReading takeChannels(const plist::Array& list, const platform::FlumeCha
 }  // namespace
 
 FlumeFileReading parseFlumeFile(std::string_view text, const FlumeFileBounds& bounds) {
-  const JsonReading json = readJson(text);
+  const JsonReading json = readJson(text, kMaximumJsonNesting, JsonNull::Absent);
   if (json.fault) {
     return {{}, json.fault->description()};
   }

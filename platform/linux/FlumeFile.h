@@ -7,9 +7,9 @@
 //     {"name": "Engine", "format": "state", "unit": "ms",
 //      "states": [{"name": "on", "transitions": 3, "residency": 1500, "duty_cycle": 0.1}]}]}
 //
-// "group", "subgroup" and "unit" may be missing, and other members may be there. Numbers are whole ones (5.0 is),
-// except the duty cycle; hits, transitions and residencies are not below 0. The "value" of a simple array is not looked
-// at.
+// "group", "subgroup" and "unit" may be missing, and other members may be there; a null is as good as missing. Numbers
+// are whole ones (5.0 is), except the duty cycle; hits, transitions and residencies are not below 0. The "value" of a
+// simple array is not looked at.
 //
 // A text that is not one whole object of this form holds no channel. A channel that is wrong in itself is left out, and
 // so is one of a name that an earlier one has, and what is beyond the bounds. Threads: any. Nothing is thrown.

@@ -114,7 +114,7 @@ struct Setting {
 
 using Node = const toml::node&;
 using Host = HostConfiguration&;
-constexpr std::array<Setting, 12> kSettings{{
+constexpr std::array<Setting, 13> kSettings{{
     {"tally", "in_use", [](Node node, Host host) { return take(node, host.tally.inUse); }},
     {"rtc", "backends", [](Node node, Host host) { return take(node, host.rtc.backends); }},
     {"rtc", "no_backends", [](Node node, Host host) { return take(node, host.rtc.noBackends); }},
@@ -123,6 +123,7 @@ constexpr std::array<Setting, 12> kSettings{{
     {"snare", "refuse", [](Node node, Host host) { return take(node, host.snare.refuse); }},
     {"paths", "diagnostic_logs", [](Node node, Host host) { return take(node, host.paths.diagnosticLogs); }},
     {"paths", "flume", [](Node node, Host host) { return take(node, host.paths.flume); }},
+    {"paths", "alsa", [](Node node, Host host) { return take(node, host.paths.alsa); }},
     {"paths", "trace_analysis",
      [](Node node, Host host) { return takePath(node, "a file", host.paths.traceAnalysis); }},
     {"recorder", "max_megabytes",

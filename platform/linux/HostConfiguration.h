@@ -29,6 +29,7 @@ struct HostConfiguration {
   struct Paths {
     std::optional<std::string> diagnosticLogs;  // the folder that holds DiagnosticLogs/; else the state directory
     std::optional<std::string> flume;  // the folder of driver report channels; else flume/ in the state directory
+    std::optional<std::string> alsa;   // the kernel's tree of sound hardware; else none is looked at
     std::optional<std::string> traceAnalysis;  // the trace-analysis library; else the one beside the program
   };
   struct Recorder {

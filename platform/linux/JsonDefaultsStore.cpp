@@ -30,7 +30,7 @@ std::int64_t nanoseconds(const timespec& time) {
 }
 
 std::string parsed(const std::string& path, std::string_view text, plist::Dictionary& values) {
-  const JsonReading reading = readJson(text);
+  const JsonReading reading = readJson(text, kMaximumJsonNesting, JsonNull::Absent);
   if (reading.fault) {
     return path + ":" + reading.fault->description();
   }

@@ -67,7 +67,8 @@ std::string cleanedFault(std::string_view what) {
 // Takes the parser's events and builds the values.
 class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
  public:
-  ValueBuilder(std::string_view text, std::size_t maximumNesting) : text_(text), maximumNesting_(maximumNesting) {}
+  ValueBuilder(std::string_view text, std::size_t maximumNesting, JsonNull nullMember)
+      : text_(text), maximumNesting_(maximumNesting), nullMember_(nullMember) {}
 
   std::size_t* readCount() { return &read_; }
   JsonReading take() {
@@ -85,7 +86,16 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
     }
   }
 
-  bool null() override { return fail("null is not allowed here"); }
+  bool null() override {
+    if (nullMember_ == JsonNull::Fault || levels_.empty() || !levels_.back().isObject) {
+      return fail("null is not allowed here");
+    }
+    keys_.pop_back();
+    if (levels_.size() == 1) {
+      reading_.memberLines.pop_back();
+    }
+    return true;
+  }
   bool boolean(bool value) override { return add(value); }
   bool number_integer(std::int64_t value) override { return add(value); }
   bool number_unsigned(std::uint64_t value) override {
@@ -196,6 +206,7 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
 
   const std::string_view text_;
   const std::size_t maximumNesting_;
+  const JsonNull nullMember_;
   std::size_t read_ = 0;
   std::size_t line_ = 1;
   std::size_t countedTo_ = 0;
@@ -212,8 +223,8 @@ std::string JsonFault::description() const {
   return std::to_string(line) + ":" + std::to_string(column) + ": " + text;
 }
 
-JsonReading readJson(std::string_view text, std::size_t maximumNesting) {
-  ValueBuilder builder(text, maximumNesting);
+JsonReading readJson(std::string_view text, std::size_t maximumNesting, JsonNull nullMember) {
+  ValueBuilder builder(text, maximumNesting, nullMember);
   const CountingIterator begin(text.data(), builder.readCount());
   const CountingIterator end(text.data() + text.size(), builder.readCount());
   nlohmann::json::sax_parse(begin, end, &builder);

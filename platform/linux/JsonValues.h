@@ -37,8 +37,15 @@ struct JsonReading {
   std::vector<std::size_t> memberLines;  // where each member of the outermost object begins, in its order
 };
 
+// What a null as the member of an object is. Anywhere else it is a fault.
+enum class JsonNull {
+  Fault,
+  Absent,  // the member isn't there; for files that people and other programs write
+};
+
 // Reads a whole text as one value. An object's member given twice is a fault.
-JsonReading readJson(std::string_view text, std::size_t maximumNesting = kMaximumJsonNesting);
+JsonReading readJson(std::string_view text, std::size_t maximumNesting = kMaximumJsonNesting,
+                     JsonNull nullMember = JsonNull::Fault);
 
 enum class JsonLayout {
   OneLine,   // without a line end

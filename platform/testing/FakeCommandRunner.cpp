@@ -5,7 +5,9 @@
 
 namespace tarn::testing {
 
-struct FakeCommandRunner::Ledger {
+struct FakeCommandRunner::Ledger : Recorded {
+  using Recorded::happened;
+
   std::mutex mutex;
   std::map<std::string, Tool, std::less<>> tools;
   std::vector<Run> runs;
@@ -27,6 +29,7 @@ class FakeCommandRunner::Running final : public platform::RunningCommand {
 
   platform::CommandEnd close() override {
     const std::lock_guard lock(ledger_->mutex);
+    ledger_->happened("close", ledger_->runs[run_].commandText);
     ledger_->runs[run_].closed = true;
     return tool_.end;
   }
@@ -43,6 +46,7 @@ FakeCommandRunner::~FakeCommandRunner() = default;
 
 platform::Outcome<std::unique_ptr<platform::RunningCommand>> FakeCommandRunner::start(
     std::string_view commandText, std::chrono::nanoseconds timeLimit) {
+  ledger_->happened("run", commandText);
   const std::lock_guard lock(ledger_->mutex);
   const auto found = ledger_->tools.find(commandText);
   Tool tool;
@@ -54,6 +58,10 @@ platform::Outcome<std::unique_ptr<platform::RunningCommand>> FakeCommandRunner::
   if (tool.refusal) return {nullptr, tool.refusal};
   ledger_->runs.push_back({std::string(commandText), timeLimit, false});
   return {std::make_unique<Running>(ledger_, ledger_->runs.size() - 1, std::move(tool)), {}};
+}
+
+void FakeCommandRunner::recordOrderIn(OrderRecord& record) {
+  ledger_->recordOrderIn(record);
 }
 
 void FakeCommandRunner::describe(std::string_view commandText, Tool tool) {

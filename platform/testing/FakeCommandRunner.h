@@ -14,6 +14,7 @@
 #include <vector>
 
 #include "platform/CommandRunner.h"
+#include "platform/testing/OrderRecord.h"
 
 namespace tarn::testing {
 
@@ -40,6 +41,7 @@ class FakeCommandRunner final : public platform::CommandRunner {
                                                                      std::chrono::nanoseconds timeLimit) override;
 
   // Controls.
+  void recordOrderIn(OrderRecord& record);
   void describe(std::string_view commandText, Tool tool);
   // The tool prints this and hangs until its time is up. No time passes in the test.
   void describeHanging(std::string_view commandText, std::string_view output);

@@ -15,6 +15,7 @@ plist::Value FakeDefaultsStore::preference(std::string_view key, std::string_vie
 }
 
 bool FakeDefaultsStore::setValue(std::string_view suite, std::string_view key, const plist::ValueView& value) {
+  happened("store", key);
   const std::lock_guard lock(mutex_);
   if (writesFail_) {
     return false;

@@ -10,10 +10,11 @@
 #include <vector>
 
 #include "platform/DefaultsStore.h"
+#include "platform/testing/OrderRecord.h"
 
 namespace tarn::testing {
 
-class FakeDefaultsStore final : public platform::DefaultsStore {
+class FakeDefaultsStore final : public platform::DefaultsStore, public Recorded {
  public:
   struct PreferenceRead {
     std::string key;

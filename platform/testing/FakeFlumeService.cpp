@@ -1,6 +1,7 @@
 #include "platform/testing/FakeFlumeService.h"
 
 #include <algorithm>
+#include <array>
 #include <utility>
 
 namespace tarn::testing {
@@ -39,7 +40,22 @@ void subtract(FlumeChannel& later, const FlumeChannel& earlier) {
   }
 }
 
+bool holds(const FlumeChannelSet& set, const FlumeChannelName& name) {
+  return std::find(set.begin(), set.end(), name) != set.end();
+}
+
+constexpr std::array<const char*, 4> kStepNames{"flume channels", "flume subscribe", "flume samples", "flume delta"};
+
 }  // namespace
+
+class FakeFlumeService::Subscription final : public platform::FlumeSubscription {
+ public:
+  explicit Subscription(FlumeChannelSet channels) : channels_(std::move(channels)) {}
+  const FlumeChannelSet& channels() const noexcept { return channels_; }
+
+ private:
+  const FlumeChannelSet channels_;
+};
 
 platform::Outcome<std::shared_ptr<const FlumeChannelSet>> FakeFlumeService::copyChannels(
     const std::optional<std::string>& group, const std::optional<std::string>& subGroup) {
@@ -58,18 +74,22 @@ platform::Outcome<std::shared_ptr<const FlumeChannelSet>> FakeFlumeService::copy
 FakeFlumeService::Subscribed FakeFlumeService::subscribe(const FlumeChannelSet& channels) {
   Subscribed subscribed;
   if (fails(Step::Subscribe, subscribed.error)) return subscribed;
-  subscribed.subscription = std::make_shared<platform::FlumeSubscription>();
-  subscribed.channels = std::make_shared<const FlumeChannelSet>(channels);
+  FlumeChannelSet covered = channels;
+  std::erase_if(covered, [this](const FlumeChannelName& name) { return holds(refused_, name); });
+  if (!withholdsHandle_) subscribed.subscription = std::make_shared<Subscription>(covered);
+  if (!withholdsChannels_) subscribed.channels = std::make_shared<const FlumeChannelSet>(std::move(covered));
   return subscribed;
 }
 
-platform::FlumeService::SamplesOutcome FakeFlumeService::createSamples(platform::FlumeSubscription&,
+platform::FlumeService::SamplesOutcome FakeFlumeService::createSamples(platform::FlumeSubscription& subscription,
                                                                        const FlumeChannelSet& subscribedChannels) {
   SamplesOutcome outcome;
   if (fails(Step::CreateSamples, outcome.error)) return outcome;
+  const FlumeChannelSet& covered = static_cast<const Subscription&>(subscription).channels();
   FlumeSamples samples;
   for (const auto& name : subscribedChannels) {
-    if (const auto* channel = find(channels_, name)) samples.push_back(*channel);
+    const auto* channel = find(channels_, name);
+    if (channel != nullptr && holds(covered, name)) samples.push_back(*channel);
   }
   outcome.value = std::make_shared<const FlumeSamples>(std::move(samples));
   return outcome;
@@ -116,6 +136,7 @@ std::size_t FakeFlumeService::calls(Step step) const {
 
 bool FakeFlumeService::fails(Step step, platform::MaybeError& error) {
   ++calls_[step];
+  happened(kStepNames[static_cast<std::size_t>(step)]);
   const auto found = failures_.find(step);
   if (found == failures_.end()) return false;
   if (found->second) error = platform::PlatformError{*found->second, "ordered by the test"};

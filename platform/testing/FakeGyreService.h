@@ -4,13 +4,17 @@
 #include <vector>
 
 #include "platform/GyreService.h"
+#include "platform/testing/OrderRecord.h"
 
 namespace tarn::testing {
 
-class FakeGyreService final : public platform::GyreService {
+class FakeGyreService final : public platform::GyreService, public Recorded {
  public:
   // The interface.
-  void requestGyre(const platform::GyreRequest& request) override { requests_.push_back(request); }
+  void requestGyre(const platform::GyreRequest& request) override {
+    happened("gyre");
+    requests_.push_back(request);
+  }
 
   // Controls.
   void clear() { requests_.clear(); }

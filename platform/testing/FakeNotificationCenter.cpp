@@ -56,6 +56,7 @@ void FakeNotificationCenter::cancel(std::int32_t token) {
 }
 
 bool FakeNotificationCenter::post(std::string_view name, std::optional<std::uint64_t> state) {
+  happened("post", name);
   std::vector<std::shared_ptr<Listening>> receivers;
   {
     const std::lock_guard lock(mutex_);

@@ -14,10 +14,11 @@
 #include <vector>
 
 #include "platform/NotificationCenter.h"
+#include "platform/testing/OrderRecord.h"
 
 namespace tarn::testing {
 
-class FakeNotificationCenter final : public platform::NotificationCenter {
+class FakeNotificationCenter final : public platform::NotificationCenter, public Recorded {
  public:
   struct Posted {
     std::string name;

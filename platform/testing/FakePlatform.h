@@ -36,6 +36,7 @@
 #include "platform/testing/ManualClock.h"
 #include "platform/testing/ManualConditions.h"
 #include "platform/testing/ManualWorkQueues.h"
+#include "platform/testing/OrderRecord.h"
 #include "platform/testing/RecordingLog.h"
 
 namespace tarn::testing {
@@ -54,6 +55,7 @@ class FakePlatform {
   // Moves the time on; work runs at the moment when it is due.
   void advance(std::chrono::nanoseconds duration) { workQueues.advance(duration); }
 
+  OrderRecord order;  // of the fakes that take part in it
   ManualClock clock;
   RecordingLog log;
   ManualWorkQueues workQueues{clock};

@@ -7,10 +7,11 @@
 #include <vector>
 
 #include "platform/PylonService.h"
+#include "platform/testing/OrderRecord.h"
 
 namespace tarn::testing {
 
-class FakePylonService final : public platform::PylonService {
+class FakePylonService final : public platform::PylonService, public Recorded {
  public:
   struct Metric {
     std::uint32_t identifier = 0;
@@ -20,6 +21,7 @@ class FakePylonService final : public platform::PylonService {
 
   // The interface.
   void post(std::uint32_t metricIdentifier, const platform::MetricRecord& record) override {
+    happened("metric");
     metrics_.push_back({metricIdentifier, record.serialized(), record.textFields()});
   }
 

@@ -9,7 +9,9 @@ namespace tarn::testing {
 
 using platform::SnareReplyKeys;
 
-struct FakeSnareService::Ledger {
+struct FakeSnareService::Ledger : Recorded {
+  using Recorded::happened;
+
   std::optional<plist::Dictionary> nextReply() {
     if (!scripted.empty()) {
       auto reply = std::move(scripted.front());
@@ -60,12 +62,14 @@ class FakeSnareService::Reporter final : public platform::SnareReporter {
   }
 
   void cancelSession(std::string_view sessionIdentifier) override {
+    ledger_->happened("snare cancel", sessionIdentifier);
     const std::lock_guard lock(ledger_->mutex);
     ledger_->calls.push_back({Kind::CancelSession, number_, {}, std::string(sessionIdentifier), true});
   }
 
  private:
   bool take(Kind kind, const platform::SnareRequest& request, ReplyHandler reply) {
+    ledger_->happened(kind == Kind::RequestSnapshot ? "snare snapshot" : "snare start");
     std::optional<plist::Dictionary> answer;
     {
       const std::lock_guard lock(ledger_->mutex);
@@ -89,8 +93,13 @@ FakeSnareService::~FakeSnareService() {
 }
 
 std::shared_ptr<platform::SnareReporter> FakeSnareService::createReporter() {
+  ledger_->happened("snare reporter");
   const std::lock_guard lock(ledger_->mutex);
   return std::make_shared<Reporter>(ledger_, ++ledger_->reporters);
+}
+
+void FakeSnareService::recordOrderIn(OrderRecord& record) {
+  ledger_->recordOrderIn(record);
 }
 
 void FakeSnareService::setAccepts(bool accepts) {

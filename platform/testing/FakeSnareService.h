@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "platform/SnareService.h"
+#include "platform/testing/OrderRecord.h"
 #include "platform/testing/ReplyFaults.h"
 
 namespace tarn::testing {
@@ -35,6 +36,7 @@ class FakeSnareService final : public platform::SnareService {
   std::shared_ptr<platform::SnareReporter> createReporter() override;
 
   // Controls.
+  void recordOrderIn(OrderRecord& record);
   // Whether requests are accepted at all.
   void setAccepts(bool accepts);
   // Replies say no, with this reason; nothing: they say yes.

@@ -9,11 +9,12 @@
 #include <vector>
 
 #include "platform/TattleService.h"
+#include "platform/testing/OrderRecord.h"
 #include "platform/testing/ReplyFaults.h"
 
 namespace tarn::testing {
 
-class FakeTattleService final : public platform::TattleService {
+class FakeTattleService final : public platform::TattleService, public Recorded {
  public:
   struct Prompt {
     platform::TattleDraft draft;
@@ -24,6 +25,7 @@ class FakeTattleService final : public platform::TattleService {
   // The interface.
   void createDraft(const platform::TattleDraft& draft, const std::optional<std::string>& processName,
                    std::string_view displayReason, Completion completion) override {
+    happened("draft");
     prompts_.push_back({draft, processName, std::string(displayReason)});
     replies_.deliver([completion = std::move(completion), error = refusal_]() mutable { completion(error); });
   }

@@ -7,10 +7,11 @@
 #include <vector>
 
 #include "platform/WattlogService.h"
+#include "platform/testing/OrderRecord.h"
 
 namespace tarn::testing {
 
-class FakeWattlogService final : public platform::WattlogService {
+class FakeWattlogService final : public platform::WattlogService, public Recorded {
  public:
   struct Event {
     std::int32_t agentIdentifier = 0;
@@ -21,6 +22,7 @@ class FakeWattlogService final : public platform::WattlogService {
   // The interface.
   void logRegisteredEvent(std::int32_t agentIdentifier, std::string_view eventName,
                           const plist::Dictionary& payload) override {
+    happened("power", eventName);
     events_.push_back({agentIdentifier, std::string(eventName), payload});
   }
 

@@ -7,7 +7,9 @@ namespace tarn::testing {
 namespace detail {
 
 // What the conditions of one ManualConditions share.
-struct WaitScript {
+struct WaitScript : Recorded {
+  using Recorded::happened;
+
   std::mutex mutex;  // guards all below
   ManualConditions::WaitHook hook;
   std::vector<std::chrono::duration<double>> timeouts;
@@ -16,6 +18,7 @@ struct WaitScript {
 }  // namespace detail
 
 bool ManualCondition::waitFor(std::chrono::duration<double> timeout) {
+  script_->happened("wait");
   ManualConditions::WaitHook hook;
   {
     const std::lock_guard lock(script_->mutex);
@@ -43,6 +46,10 @@ ManualConditions::~ManualConditions() = default;
 std::shared_ptr<platform::Condition> ManualConditions::makeCondition() {
   made_.push_back(std::make_shared<ManualCondition>(script_));
   return made_.back();
+}
+
+void ManualConditions::recordOrderIn(OrderRecord& record) {
+  script_->recordOrderIn(record);
 }
 
 void ManualConditions::onWait(WaitHook hook) {

@@ -15,6 +15,7 @@
 #include <vector>
 
 #include "platform/Condition.h"
+#include "platform/testing/OrderRecord.h"
 
 namespace tarn::testing {
 
@@ -59,6 +60,7 @@ class ManualConditions final : public platform::Conditions {
   std::shared_ptr<platform::Condition> makeCondition() override;
 
   // Controls.
+  void recordOrderIn(OrderRecord& record);
   // Called in every wait of every condition from here; an empty one makes waits time out at once again.
   void onWait(WaitHook hook);
 

@@ -1,6 +1,7 @@
 #include "platform/testing/RecordingLog.h"
 
 #include <algorithm>
+#include <utility>
 
 namespace tarn::testing {
 
@@ -21,9 +22,17 @@ std::string RecordingLog::Entry::message() const {
 }
 
 void RecordingLog::write(const platform::LogEntry& entry) noexcept {
+  Entry kept{std::string(entry.category.subsystem),
+             std::string(entry.category.code),
+             entry.level,
+             std::string(entry.module),
+             entry.line,
+             std::string(entry.text)};
+  if (isRecorded()) {
+    happened("log", kept.message());
+  }
   const std::lock_guard lock(mutex_);
-  entries_.push_back({std::string(entry.category.subsystem), std::string(entry.category.code), entry.level,
-                      std::string(entry.module), entry.line, std::string(entry.text)});
+  entries_.push_back(std::move(kept));
 }
 
 void RecordingLog::clear() {

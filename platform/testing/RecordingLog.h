@@ -10,10 +10,11 @@
 #include <vector>
 
 #include "platform/Log.h"
+#include "platform/testing/OrderRecord.h"
 
 namespace tarn::testing {
 
-class RecordingLog final : public platform::Log {
+class RecordingLog final : public platform::Log, public Recorded {
  public:
   struct Entry {
     std::string subsystem;

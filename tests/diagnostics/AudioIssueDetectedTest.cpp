@@ -241,6 +241,33 @@ TEST(AudioIssueDetected, FieldsOfTheTextKeepTheirNamesAndOrder) {
   EXPECT_EQ(json, R"({"duration":0,"issuetype":"glitch","node":"","rtaidclient":"","timestamp":7})");
 }
 
+TEST(AudioIssueDetected, CharactersThatAreNotPrintableAreEscaped) {
+  TextLines lines;
+  lines.formatString("s", "\x1f \x7e\x7f\x80\xff\r\t'");
+  EXPECT_EQ(lines.text(), "s: \"\\037 ~\\177\\200\\377\\r\\t\\'\"\n");
+}
+
+TEST(AudioIssueDetected, ObjectsWithinObjectsAreIndentedByTwo) {
+  TextLines lines;
+  lines.beginObject("outer");
+  lines.beginObject("inner");
+  lines.formatUnsigned("n", 1);
+  lines.endObject();
+  lines.formatSigned("n", -1);
+  lines.endObject();
+  lines.formatSigned("n", 2);
+  EXPECT_EQ(lines.text(), "outer {\n  inner {\n    n: 1\n  }\n  n: -1\n}\nn: 2\n");
+}
+
+TEST(WireWriter, TakingTheBytesLeavesNone) {
+  WireWriter writer;
+  writer.writeUnsigned(1, 127);
+  EXPECT_EQ(writer.take(), "\x08\x7f");
+  EXPECT_EQ(writer.bytes(), "");
+  writer.writeUnsigned(31, 128);
+  EXPECT_EQ(writer.take(), "\xf8\x01\x80\x01");
+}
+
 // The order of the virtual operations, as the two ABIs of this platform keep it in a pointer to a member: the offset in
 // the table, with or without 1 added. Two destructors stand before the first operation.
 template <class Member>

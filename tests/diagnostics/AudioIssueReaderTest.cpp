@@ -264,6 +264,62 @@ TEST(AudioIssueReader, EveryPrefixOfARecordIsReadWithoutHarm) {
   EXPECT_EQ(good, 6U);  // before the first field and behind each of the five
 }
 
+// The reader by itself.
+
+TEST(WireReader, AReadThatFailsDoesNotMoveOn) {
+  const std::string text = "\x05wxyz";
+  WireReader cutText(text);
+  std::string kept = "kept";
+  cutText.readString(kept);
+  EXPECT_TRUE(cutText.failed());
+  EXPECT_EQ(cutText.position(), 0U);
+  EXPECT_EQ(kept, "kept");
+  WireReader cutNumber("\x81");
+  EXPECT_EQ(cutNumber.readVarint(), 0U);
+  EXPECT_TRUE(cutNumber.failed());
+  EXPECT_EQ(cutNumber.position(), 0U);
+  const std::string group = "\x08\x01\x12\x05xy";
+  WireReader cutGroup(group);
+  EXPECT_FALSE(cutGroup.skip(6, 3));
+  EXPECT_TRUE(cutGroup.failed());
+  EXPECT_EQ(cutGroup.position(), 0U);
+}
+
+TEST(WireReader, SkipsAValueToItsLastByte) {
+  const auto positionAfter = [](const std::string& bytes, unsigned type) {
+    WireReader reader(bytes);
+    EXPECT_TRUE(reader.skip(6, type));
+    return reader.position();
+  };
+  EXPECT_EQ(positionAfter("\x81\x01"s, 0), 2U);
+  EXPECT_EQ(positionAfter("12345678", 1), 8U);
+  EXPECT_EQ(positionAfter("\x02xy"s, 2), 3U);
+  EXPECT_EQ(positionAfter("\x08\x01\x34"s, 3), 3U);
+  EXPECT_EQ(positionAfter("1234", 5), 4U);
+}
+
+TEST(WireReader, NoOtherTypeIsSkipped) {
+  for (const unsigned type : {4U, 6U, 7U}) {
+    WireReader reader("1234567890");
+    EXPECT_FALSE(reader.skip(6, type)) << type;
+    EXPECT_TRUE(reader.failed());
+    EXPECT_EQ(reader.position(), 0U);
+  }
+}
+
+TEST(WireReader, GroupsAreSkippedAHundredDeep) {
+  EXPECT_EQ(WireReader::kDeepestGroup, 100U);
+}
+
+TEST(AudioIssueReader, AFailedReaderAtItsEndIsNoFailureOfTheNextRecord) {
+  const std::string bytes = "\x10";
+  WireReader reader(bytes);
+  AudioIssueDetected record;
+  EXPECT_FALSE(record.readFrom(reader));
+  EXPECT_TRUE(reader.atEnd());
+  EXPECT_TRUE(record.readFrom(reader));
+}
+
 // NOLINTEND(modernize-raw-string-literal)
 
 }  // namespace

@@ -4,6 +4,7 @@
 
 #include <cmath>
 
+#include "diagnostics/TarnReportingDiagnosticDefaults.h"
 #include "tests/diagnostics/OddValues.h"
 #include "tests/session/SessionFixture.h"
 
@@ -52,6 +53,10 @@ class DPWorker : public SessionFixture {
     }
     return found;
   }
+  std::string lastLine(platform::LogLevel level) const {
+    const Strings found = lines(level);
+    return found.empty() ? "no line" : found.back();
+  }
 };
 
 TEST_F(DPWorker, IsMadeOnAnInternalBuildWithTheSettingOn) {
@@ -74,6 +79,7 @@ TEST_F(DPWorker, IsNotMadeWhenTheSettingIsFalse) {
 TEST_F(DPWorker, IsNotMadeOnOtherBuilds) {
   platform_.deviceProperties.set("InternalBuild", false);
   EXPECT_EQ(startedSession()->workerInstanceCount(), 0U);
+  EXPECT_EQ(lines(LogLevel::Debug), (Strings{"Value of enable_gyre is 1"}));  // the setting is read first
 }
 
 TEST_F(DPWorker, IsNotMadeWhereThereIsNoSuchService) {
@@ -160,7 +166,7 @@ TEST_F(DPWorker, ThePayloadIsThatOfTheMoment) {
 TEST_F(DPWorker, ANotificationThatCannotBePostedChangesNothing) {
   platform_.notifications.failPosts(true);
   EXPECT_EQ(gyresOf({{"smallest_buffer_frame_size", 512}}), 1U);
-  EXPECT_EQ(lines(LogLevel::Info).back(), "Dropped gyre");
+  EXPECT_EQ(lastLine(LogLevel::Info), "Dropped gyre");
 }
 
 TEST_F(DPWorker, RequestsAreMoreThanTenSecondsApart) {
@@ -233,7 +239,7 @@ TEST_F(DPWorker, AnOverloadTooEarlyTellsTheTimeSinceTheLast) {
   sendOverload(*session, {{"smallest_buffer_frame_size", 512}});
   platform_.clock.advance(10s);
   sendOverload(*session, {{"smallest_buffer_frame_size", 600}});
-  EXPECT_EQ(lines(LogLevel::Debug).back(),
+  EXPECT_EQ(lastLine(LogLevel::Debug),
             "Did not drop gyre, right conditions not met: buffer size : 600, time diff : 10.000000, io cycle: 0");
 }
 
@@ -318,14 +324,80 @@ TEST_F(DPWorker, AnyValueOfAMessageIsReadAsItsKind) {
 
 TEST_F(DPWorker, AnApplicationThatIsNoTextIsGivenByItsTextForm) {
   for (const auto& [value, number] : oddValues()) {
+    platform_.gyre.clear();
     EXPECT_EQ(gyresOf({{"smallest_buffer_frame_size", 512}, {"HostApplicationDisplayID", value}}), 1U);
-    EXPECT_EQ(platform_.gyre.requests().back().applicationIdentifier, plist::description(value));
+    EXPECT_EQ(platform_.gyre.requests().at(0).applicationIdentifier, plist::description(value));
   }
 }
 
 TEST_F(DPWorker, AStoreThatCannotBeReadMeansNoWorker) {
   platform_.defaults.failReads(true);
   EXPECT_EQ(startedSession()->workerInstanceCount(), 0U);
+}
+
+TEST_F(DPWorker, WaitsThenTellsThenAsksThenNotifiesThenTells) {
+  set("wait_time", 1000);
+  const auto session = startedSession();
+  platform_.order.start();
+  TarnReportingSessionDPWorker worker(session);
+  const auto overload = message({{"smallest_buffer_frame_size", 512}}, AudioEventCategory::IO, AudioEventType::Error);
+  worker.handleMessage(overload);
+  EXPECT_EQ(platform_.order.entries(),
+            (Strings{"log Interested in overload", "wait", "log Dropping gyre {smallest_buffer_frame_size = 512}",
+                     "gyre", "post sys.oxbow.tarnkit.dropped-gyre", "log Dropped gyre"}));
+}
+
+TEST_F(DPWorker, AnOverloadThatDoesNotCountWaitsForNothing) {
+  set("wait_time", 1000);
+  const auto session = startedSession();
+  platform_.order.start();
+  TarnReportingSessionDPWorker(session).handleMessage(
+      message({{"smallest_buffer_frame_size", 511}}, AudioEventCategory::IO, AudioEventType::Error));
+  EXPECT_EQ(platform_.order.entries(),
+            (Strings{"log Interested in overload",
+                     "log Did not drop gyre, right conditions not met: buffer size : 511, time diff : "
+                     "1750000000.000000, io cycle: 0"}));
+}
+
+TEST_F(DPWorker, AWaitThatEndsToTheNanosecondIsOver) {
+  set("wait_time", 250000);
+  platform_.conditions.onWait([this](Seconds) {
+    platform_.clock.advance(125ms);
+    return WaitOutcome::Wakes;
+  });
+  EXPECT_EQ(gyresOf({{"smallest_buffer_frame_size", 512}}), 1U);
+  EXPECT_EQ(platform_.conditions.timeouts(), (std::vector<Seconds>{250ms, 125ms}));
+}
+
+TEST_F(DPWorker, AServiceThatGoesAwayLeavesTheNotification) {
+  const auto session = startedSession();
+  platform_.facilities().gyre = nullptr;
+  sendOverload(*session, {{"smallest_buffer_frame_size", 512}});
+  EXPECT_EQ(gyres(), 0U);
+  EXPECT_EQ(platform_.notifications.posted().size(), 1U);
+  EXPECT_EQ(lastLine(LogLevel::Info), "Dropped gyre");
+}
+
+TEST_F(DPWorker, TheSettingsAreOneSuiteOfTheProcess) {
+  const TarnReportingDiagnosticDefaults& defaults = TarnReportingSessionDPWorker::getUserDefaults();
+  EXPECT_EQ(&TarnReportingSessionDPWorker::getUserDefaults(), &defaults);
+  set("io_cycle", 7);
+  EXPECT_EQ(defaults.value("io_cycle"), plist::Value(7));
+  EXPECT_TRUE(defaults.setValue("other", "written"));
+  EXPECT_EQ(platform_.defaults.value(kSuite, "other"), plist::Value("written"));
+}
+
+TEST_F(DPWorker, ASettingIsReadAsWhatIsAskedFor) {
+  using Worker = TarnReportingSessionDPWorker;
+  EXPECT_FALSE(Worker::getEnableFlag("key"));
+  EXPECT_EQ(Worker::getRunTimeDefaults("key"), 0);
+  EXPECT_EQ(Worker::getDoubleRunTimeDefaults("key"), 0.0);
+  EXPECT_TRUE(lines(LogLevel::Debug).empty());
+  set("key", -2.75);
+  EXPECT_TRUE(Worker::getEnableFlag("key"));
+  EXPECT_EQ(Worker::getRunTimeDefaults("key"), -2);
+  EXPECT_EQ(Worker::getDoubleRunTimeDefaults("key"), -2.75);
+  EXPECT_EQ(lines(LogLevel::Debug), (Strings(3, "Value of key is -2.75")));
 }
 
 }  // namespace

@@ -106,6 +106,7 @@ TEST_F(DriverSnapshotWorker, SecondStopWithoutAStartCountsAgainstNoSnapshot) {
   EXPECT_EQ(takeCounted(), counted(2));
   workerOf(*session).stop();
   // The consumers have stopped; the session's log has it.
+  ASSERT_FALSE(session->messages().empty());
   EXPECT_EQ(session->messages().back()->message()["OxbowFoo_Haptics_Stats_Simple_a"].asInt64(), 12);
 }
 

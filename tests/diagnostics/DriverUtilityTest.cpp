@@ -311,5 +311,94 @@ TEST_F(DriverUtility, ChannelsOfOneKeyShareOneEntryTheLastOneWins) {
   EXPECT_EQ(received(AudioEventType::Simple), (plist::Dictionary{{"OxbowFoo_Haptics_Stats_Simple_ab", 2}}));
 }
 
+TEST_F(DriverUtility, OnlyChannelsThatWereSubscribedAreKeptAndSampled) {
+  flume_.setChannel(simpleChannel(hapticsName("a"), 1));
+  flume_.setChannel(simpleChannel(hapticsName("b"), 1));
+  flume_.refuseSubscription(hapticsName("a"));
+  Utility utility(flume_);
+  utility.init();
+  ASSERT_EQ(utility.ioChannelSubscriptions().size(), 1U);
+  EXPECT_EQ(utility.ioChannelSubscriptions()[0].subscribedChannels, (platform::FlumeChannelSet{hapticsName("b")}));
+  const auto samples = utility.getSnapShot().at("Haptics-Stats");
+  ASSERT_EQ(samples->size(), 1U);
+  EXPECT_EQ(samples->at(0).name, hapticsName("b"));
+}
+
+TEST_F(DriverUtility, EachDriverIsSampledByItsOwnSubscription) {
+  flume_.setChannel(simpleChannel({"d", "Rx", {}, "a"}, 1));
+  flume_.setChannel(simpleChannel({"d", "Tx", {}, "b"}, 1));
+  runSession([&] {
+    flume_.setChannel(simpleChannel({"d", "Rx", {}, "a"}, 2));
+    flume_.setChannel(simpleChannel({"d", "Tx", {}, "b"}, 4));
+  });
+  EXPECT_EQ(received(AudioEventType::Simple), (plist::Dictionary{{"d_Rx_Simple_a", 1}, {"d_Tx_Simple_b", 3}}));
+}
+
+TEST_F(DriverUtility, ASubscriptionWithoutAHandleOrWithoutChannelsIsNone) {
+  flume_.setChannel(simpleChannel(hapticsName("a"), 1));
+  flume_.withholdHandle();
+  Utility withoutHandle(flume_);
+  withoutHandle.init();
+  EXPECT_TRUE(withoutHandle.ioChannelSubscriptions().empty());
+  FakeFlumeService other;
+  other.setChannel(simpleChannel(hapticsName("a"), 1));
+  other.withholdChannels();
+  Utility withoutChannels(other);
+  withoutChannels.init();
+  EXPECT_TRUE(withoutChannels.ioChannelSubscriptions().empty());
+  EXPECT_EQ(lines(LogLevel::Error), Lines(2, "error 0 creating subscription for Haptics-Stats"));
+}
+
+TEST_F(DriverUtility, TellsOfASamplingBeforeItAndOfTheLatestSamplesAroundIt) {
+  flume_.setChannel(simpleChannel(hapticsName("a"), 1));
+  Utility utility(flume_);
+  platform_.order.start();
+  utility.init();
+  const Lines subscribing = platform_.order.entries();
+  ASSERT_EQ(subscribing.size(), 1U + 9U * 2U + 1U);
+  EXPECT_EQ(subscribing[0], "log creating flume driver utility");
+  EXPECT_EQ(subscribing[1], "flume channels");
+  EXPECT_EQ(Lines(subscribing.begin() + 7, subscribing.begin() + 10),
+            (Lines{"flume channels", "flume subscribe", "log subscribed to group group Haptics-Stats"}));
+  platform_.order.start();
+  const auto snapShot = utility.getSnapShot();
+  EXPECT_EQ(platform_.order.entries(), (Lines{"log sampling driver Haptics-Stats", "flume samples"}));
+  const auto session = makeSession();
+  platform_.order.start();
+  utility.sendDriverLogsForSession(*session, snapShot);
+  EXPECT_EQ(platform_.order.entries(),
+            (Lines{"log getting latest samples", "flume samples", "log done getting latest samples", "flume delta"}));
+}
+
+TEST_F(DriverUtility, BoundsThatFailWithAnyCodeAreLoggedAndHitsBelowZeroAreHits) {
+  EXPECT_EQ(histogram(histogramChannel({{}, {}, {}, "x"}, {{0, 1, -2}, {1, 2, 0, 5}}))["Histogram_x"].text(),
+            "count=2,lower=0,upper=2,min=3,max=17,unit=us::0-1:-2");
+  EXPECT_EQ(lines(LogLevel::Info), (Lines{"Error in getting the bucket bounds : 5"}));
+}
+
+TEST_F(DriverUtility, EveryBucketWidensTheRange) {
+  EXPECT_EQ(histogram(histogramChannel({{}, {}, {}, "x"}, {{-5, 9, 0}, {-7, 3, 0}, {-6, 8, 1}}))["Histogram_x"].text(),
+            "count=3,lower=-7,upper=9,min=3,max=17,unit=us::-6-8:1");
+}
+
+TEST_F(DriverUtility, DutyCycleThatIsNoNumberHasNoSign) {
+  const double nan = std::numeric_limits<double>::quiet_NaN();
+  for (const double dutyCycle : {nan, -nan}) {
+    EXPECT_EQ(state(stateChannel({{}, {}, {}, "x"}, {{"on", 1, 1, dutyCycle}}))["State_x"].text(),
+              "name:on,transition:1,residency:1,duty_cycle:nan;");
+  }
+}
+
+TEST_F(DriverUtility, AgainstNoSnapshotAllOfItIsSent) {
+  flume_.setChannel(histogramChannel(hapticsName("h"), {{0, 9, 5}}));
+  flume_.setChannel(stateChannel(hapticsName("s"), {{"on", 1, 1, 0}}));
+  const auto session = makeSession();
+  Utility utility(flume_);
+  utility.init();
+  session->start();
+  utility.sendDriverLogsForSession(*session, {});
+  EXPECT_EQ(receivedTypes(), (std::vector{AudioEventType::Histogram, AudioEventType::State}));
+}
+
 }  // namespace
 }  // namespace tarn

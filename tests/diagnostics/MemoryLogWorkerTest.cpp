@@ -2,6 +2,9 @@
 // cut into entries.
 #include "diagnostics/TarnReportingSessionMemoryLogWorker.h"
 
+#include <algorithm>
+#include <map>
+
 #include "diagnostics/TarnReportingMemoryLogLimiter.h"
 #include "tests/diagnostics/OddValues.h"
 #include "tests/session/SessionFixture.h"
@@ -404,6 +407,107 @@ TEST_F(MemoryLogWorker, AWakeWithoutAResultWaitsOn) {
   request(*startedSession());
   EXPECT_EQ(blocks().size(), 1U);
   EXPECT_EQ(waits, 3);
+}
+
+// The blocks behind their heads, by number.
+std::map<std::string, std::string> joined(const Strings& entries) {
+  std::map<std::string, std::string> texts;
+  for (const std::string& entry : entries) {
+    const std::size_t head = std::min(entry.find('\n'), entry.size());
+    texts[entry.substr(0, head)] += entry.substr(std::min(head + 1, entry.size()));
+  }
+  return texts;
+}
+
+TEST_F(MemoryLogWorker, ABlockThatALogEntryCannotHoldIsSeveralEntriesOfItsNumber) {
+  const std::string line(2047 * 70, 'x');
+  std::string block;
+  for (int piece = 0; piece < 70; ++piece) {
+    block += "wiredlog: " + std::string(2047, 'x');
+  }
+  block += "wiredlog: \n";
+  const Strings found = blocksOf(kZones, line + "\nshort\n");
+  EXPECT_EQ(found.size(), 4U);
+  for (const std::string& entry : found) {
+    EXPECT_EQ(entry.find(" more bytes)"), std::string::npos);
+  }
+  EXPECT_EQ(joined(found), (std::map<std::string, std::string>{{"WIRED LOG BLOCK 1", block},
+                                                               {"WIRED LOG BLOCK 2", "wiredlog: short\n"}}));
+}
+
+TEST_F(MemoryLogWorker, ABlockOfAsMuchAsAnEntryHoldsIsOneEntry) {
+  // 65,536 bytes, but for 64 that are the head's.
+  const std::size_t tags = 32 * 10;  // 31 whole pieces and the rest
+  const auto entriesOf = [&](std::size_t blockBytes) {
+    return blocksOf(kZones, std::string(blockBytes - tags - 1, 'x') + "\n").size();
+  };
+  EXPECT_EQ(entriesOf(65472), 1U);
+  EXPECT_EQ(entriesOf(65473), 2U);
+}
+
+TEST_F(MemoryLogWorker, AnEntryOfABlockDoesNotEndInsideACharacter) {
+  std::string line;
+  while (line.size() < 100'000) {
+    line += "\xE2\x82\xAC";
+  }
+  for (const char* lead : {"", "a", "ab"}) {
+    for (const std::string& entry : blocksOf(kZones, lead + line + "\n")) {
+      EXPECT_NE(static_cast<unsigned char>(entry[entry.find('\n') + 1]) & 0xC0U, 0x80U);
+      EXPECT_FALSE(entry.empty());
+    }
+  }
+  // Bytes that are no characters are cut all the same.
+  EXPECT_EQ(blocksOf(kZones, std::string(100'000, '\x80') + "\n").size(), 2U);
+}
+
+TEST_F(MemoryLogWorker, BoundsAreAsDocumented) {
+  EXPECT_EQ(Worker::kToolTimeLimit, 60s);
+  EXPECT_EQ(Worker::kPatience, 75s);
+  EXPECT_EQ(Worker::kMostBytesRead, 16'777'216U);
+  EXPECT_EQ(Worker::kMostBytesKept, 1'048'576U);
+}
+
+TEST_F(MemoryLogWorker, EachToolSignalsOnceThatItIsDone) {
+  request(*startedSession());
+  ASSERT_EQ(platform_.conditions.made().size(), 2U);
+  EXPECT_EQ(platform_.conditions.made()[0]->signals(), 1U);
+  EXPECT_EQ(platform_.conditions.made()[1]->signals(), 1U);
+  EXPECT_EQ(platform_.conditions.timeouts(), (std::vector<std::chrono::duration<double>>{75s}));
+}
+
+TEST_F(MemoryLogWorker, AWaitThatTimesOutIsNotRepeated) {
+  std::size_t waits = 0;
+  platform_.conditions.onWait([&](auto) {
+    if (++waits > 2) {
+      platform_.clock.advance(80s);  // or it would wait for ever
+    }
+    return WaitOutcome::TimesOut;
+  });
+  request(*startedSession());
+  EXPECT_EQ(waits, 2U);  // one for each tool
+  EXPECT_EQ(platform_.log.count("gave up waiting for"), 2U);
+}
+
+TEST_F(MemoryLogWorker, WhenThePatienceIsOverToTheNanosecondNothingIsWaitedFor) {
+  platform_.conditions.onWait([this](auto) {
+    platform_.clock.advance(75s);
+    return WaitOutcome::Wakes;
+  });
+  request(*startedSession());
+  EXPECT_EQ(platform_.conditions.timeouts().size(), 1U);
+}
+
+TEST_F(MemoryLogWorker, AToolIsToldThenRunThenClosedThenToldAndTheBlocksComeLast) {
+  describe(kZones, "zone\n");
+  const auto session = startedSession();
+  platform_.order.start();
+  Worker(session).handleMessage(message({}, AudioEventCategory::Generic, AudioEventType::MemoryLog));
+  EXPECT_EQ(platform_.order.entries(),
+            (Strings{"wait", "log wiredlog: requesting '/usr/bin/zonetally -l'", "run /usr/bin/zonetally -l",
+                     "close /usr/bin/zonetally -l", "log wiredlog: request /usr/bin/zonetally -l captured",
+                     "log wiredlog: requesting '/usr/local/bin/restop'", "run /usr/local/bin/restop",
+                     "close /usr/local/bin/restop", "log wiredlog: unable to execute '/usr/local/bin/restop'",
+                     "log WIRED LOG BLOCK 1\nwiredlog: zone\n"}));
 }
 
 TEST(MemoryLogLimiter, TheFirstIsAlwaysLetThrough) {

@@ -205,5 +205,13 @@ TEST_F(PylonWorker, WithoutAMetricServiceThereIsNoWorker) {
   EXPECT_TRUE(errors().empty());
 }
 
+TEST_F(PylonWorker, WhatIsMissingIsToldBeforeThePost) {
+  const auto worker = TarnReportingSessionPylonWorker::initWithSession(makeSession());
+  platform_.order.start();
+  worker->handleMessage(issue({{"issue_type", "x"}, {"rtaid_client", "y"}, {"node", "z"}}));
+  EXPECT_EQ(platform_.order.entries(),
+            (Strings{"log Failed to get any_channel_silence_seconds for AudioIssueDetected", "metric"}));
+}
+
 }  // namespace
 }  // namespace tarn

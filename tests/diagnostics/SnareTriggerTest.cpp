@@ -1,5 +1,6 @@
 // When a fault detector fires: the decisions by themselves, and the worker that keeps the rule with instances of the
 // test's own.
+#include <functional>
 #include <limits>
 
 #include "tests/diagnostics/SnareFixture.h"
@@ -113,12 +114,29 @@ TEST(WorkerInstanceState, ARepeatIsEqualValueByValueWhateverTheOrder) {
   EXPECT_FALSE(state.repeatsLastMessage({}));
 }
 
+TEST(WorkerInstanceState, WithoutACountAndWithoutAnInterestItIsTooSoon) {
+  WorkerInstanceState state;
+  state.interestThresholdCount = 0;
+  state.interestThresholdDurationSeconds = 60;
+  EXPECT_EQ(state.verdict(kNow), Verdict::TooSoon);
+}
+
+TEST(WorkerInstanceState, FiredOftenAndOncePerSessionNeverFires) {
+  WorkerInstanceState state;
+  state.interestThresholdCount = 1;
+  state.oncePerSession = true;
+  state.firedCount = 2;
+  state.count(kNow);
+  EXPECT_EQ(state.verdict(kNow), Verdict::FiredBefore);
+}
+
 // What the instances below do and how they are set up; fresh for each test.
 struct ProbeScript {
   std::uint64_t thresholdCount = 2;
   double thresholdSeconds = 60;
   bool once = false;
-  std::vector<std::string> trail;  // "Name verb n"
+  std::vector<std::string> trail;                     // "Name verb n"
+  std::function<void(const std::string& verb)> look;  // called in each operation of WholeProbe
 };
 ProbeScript& probes() {
   static ProbeScript instance;
@@ -141,8 +159,14 @@ class Probe : public TarnReportingSnareWorkerInstance {
   }
 
  protected:
+  static void look(const std::string& verb) {
+    if (probes().look) {
+      probes().look(verb);
+    }
+  }
   static void note(const std::string& verb, const TarnReportingSessionMessage& message) {
     probes().trail.push_back(std::string(Self::kClassName) + " " + verb + " " + message.message()["n"].asText());
+    look(verb);
   }
 };
 
@@ -153,8 +177,14 @@ class WholeProbe : public Probe<WholeProbe> {
   static bool handleSingleMessageSession() { return true; }
   void handleMessage(const TarnReportingSessionMessage& message) { note("handle", message); }
   void fire(const TarnReportingSessionMessage& message) { note("fire", message); }
-  void start() { probes().trail.emplace_back("WholeProbe start"); }
-  void stop() { probes().trail.emplace_back("WholeProbe stop"); }
+  void start() {
+    probes().trail.emplace_back("WholeProbe start");
+    look("start");
+  }
+  void stop() {
+    probes().trail.emplace_back("WholeProbe stop");
+    look("stop");
+  }
 };
 
 class FiringProbe : public Probe<FiringProbe> {
@@ -389,6 +419,65 @@ TEST_F(SnareTrigger, WithoutItsSessionItCountsNothing) {
   EXPECT_EQ(state().interestedCount, 0U);
   EXPECT_EQ(worker_.instances().size(), 1U);
   worker_.stop();
+}
+
+TEST_F(SnareTrigger, AnInstanceStartsAndStopsWhileTheWorkerIsStarted) {
+  useProbes<WholeProbe>();
+  std::vector<std::string> started;
+  probes().look = [&](const std::string& verb) {
+    if (worker_.started()) {
+      started.push_back(verb);
+    }
+  };
+  worker_.start();
+  worker_.stop();
+  EXPECT_EQ(started, (std::vector<std::string>{"start", "stop"}));
+}
+
+TEST_F(SnareTrigger, AnInstanceIsHandedAMessageThatIsCountedButNotYetTheLast) {
+  useProbes<WholeProbe>();
+  std::vector<std::uint64_t> counts;
+  std::size_t withALast = 0;
+  probes().look = [&](const std::string& verb) {
+    if (verb == "handle") {
+      counts.push_back(state().interestedCount);
+      withALast += state().lastMessage != nullptr ? 1U : 0U;
+      EXPECT_TRUE(state().interestFirstSeen.get());
+    }
+  };
+  handle(1);
+  EXPECT_EQ(withALast, 0U);
+  handle(2);
+  EXPECT_EQ(counts, (std::vector<std::uint64_t>{1, 2}));
+  EXPECT_EQ(withALast, 1U);
+}
+
+TEST_F(SnareTrigger, AnInstanceFiresWithItsReporterAndItsCountBeforeAllIsReset) {
+  useProbes<WholeProbe>();
+  bool fired = false;
+  probes().look = [&](const std::string& verb) {
+    if (verb == "fire") {
+      fired = true;
+      EXPECT_TRUE(state().symptomReporter != nullptr);
+      EXPECT_EQ(state().firedCount, 1U);
+      EXPECT_EQ(state().interestedCount, 2U);
+      ASSERT_TRUE(state().lastMessage != nullptr);
+      EXPECT_EQ(state().lastMessage->message()["n"].asInt64(), 2);
+    }
+  };
+  handleAll({1, 2});
+  EXPECT_TRUE(fired);
+}
+
+TEST_F(SnareTrigger, InterestIsToldThenTheMessageCopiedThenTheReporterMade) {
+  probes().thresholdCount = 1;
+  useProbes<WholeProbe>();
+  platform_.order.start();
+  handle(1);
+  EXPECT_EQ(
+      platform_.order.entries(),
+      (std::vector<std::string>{"log Interested in message. instance=WholeProbe, category=Playback type=Start {n = 1}",
+                                "log copyWithZone", "snare reporter"}));
 }
 
 }  // namespace

@@ -56,6 +56,10 @@ class TattleWorker : public SessionFixture {
     }
     return found;
   }
+  std::string lastLine(platform::LogLevel level) const {
+    const Strings found = lines(level);
+    return found.empty() ? "no line" : found.back();
+  }
 
  private:
   int serial_ = 0;
@@ -200,7 +204,7 @@ TEST_F(TattleWorker, ARunPromptsOnceThoughTheBackOffIsOver) {
   platform_.log.clear();
   sendError(*session, 6);
   EXPECT_EQ(prompts(), 1U);
-  EXPECT_EQ(lines(LogLevel::Debug).back(), "Tattle has already run for ParleyXYerrorMessage reporterID=5");
+  EXPECT_EQ(lastLine(LogLevel::Debug), "Tattle has already run for ParleyXYerrorMessage reporterID=5");
   EXPECT_TRUE(lines(LogLevel::Default).empty());
   EXPECT_EQ(lastRun().view().asDouble(), now());  // asking has claimed the period
 }
@@ -209,7 +213,7 @@ TEST_F(TattleWorker, TheNextRunMayPromptAgain) {
   const auto session = armedSession(5);
   sendError(*session, 6);
   session->stop();
-  EXPECT_EQ(lines(LogLevel::Debug).back(), "Resetting hasRun to false. reporterID=5");
+  EXPECT_EQ(lastLine(LogLevel::Debug), "Resetting hasRun to false. reporterID=5");
   platform_.clock.advance(3601s);
   session->start();
   sendError(*session, 6);  // the worker is armed still
@@ -293,6 +297,85 @@ TEST_F(TattleWorker, AnyValueUnderTheKeysOfAMessageIsBorne) {
     EXPECT_FALSE(session->started());
   }
   EXPECT_EQ(prompts(), oddValues().size());
+}
+
+TEST_F(TattleWorker, AMomentOfZeroIsNotArmedYet) {
+  const auto session = startedSession();
+  TarnReportingSessionTattleWorker worker(session, kHour);
+  const auto handle = [&worker](double stamp) {
+    worker.handleMessage(message({{"plac_invalid_x", 1}, {"tarnreporting_timestamp", stamp}}));
+  };
+  EXPECT_EQ(worker.minimumMessageTime(), -1.0);
+  handle(-5);  // five seconds later it is 0
+  EXPECT_EQ(worker.minimumMessageTime(), 0.0);
+  handle(100);  // so this one arms
+  EXPECT_EQ(worker.minimumMessageTime(), 105.0);
+  EXPECT_EQ(prompts(), 0U);
+  handle(105.5);
+  EXPECT_EQ(prompts(), 1U);
+}
+
+TEST_F(TattleWorker, ClaimsThePeriodThenTellsThenPrompts) {
+  const auto session = armedSession(9);
+  platform_.order.start();
+  sendError(*session, 6);
+  Strings entries = platform_.order.entries();
+  std::erase_if(entries, [](const std::string& entry) { return entry.starts_with("log TarnReporting"); });
+  EXPECT_EQ(entries,
+            (Strings{"log Tattle has not run. key=ParleyInvalidXyTatlastRun backoffSeconds=3600.000000",
+                     "store ParleyInvalidXyTatlastRun", "log Starting tattle for ParleyXYerrorMessage reporterID=9",
+                     "draft", "log Successfully created draft"}));
+}
+
+TEST_F(TattleWorker, ItsRunIsTakenBeforeThePromptAndGivenBackAfterTheStopsLine) {
+  const auto session = startedSession();
+  TarnReportingSessionTattleWorker worker(session, kHour);
+  std::vector<std::pair<std::string, bool>> runs;
+  platform_.order.start([&](const std::string& entry) {
+    if (entry == "draft" || entry.starts_with("log Resetting")) {
+      runs.emplace_back(entry, worker.hasRun());
+    }
+  });
+  worker.handleMessage(message({{"n", 1}, {"tarnreporting_timestamp", now()}}));
+  worker.handleMessage(message({{"plac_invalid_x", 1}, {"tarnreporting_timestamp", now() + 6}}));
+  worker.stop();
+  EXPECT_EQ(runs, (std::vector<std::pair<std::string, bool>>{{"draft", true},
+                                                             {"log Resetting hasRun to false. reporterID=7", true}}));
+  EXPECT_FALSE(worker.hasRun());
+}
+
+TEST_F(TattleWorker, ABackOffThatIsOverIsAskedForWithTheTimeOfNow) {
+  using Worker = TarnReportingSessionTattleWorker;
+  EXPECT_FALSE(Worker::hasRunInTimeframe(60, "key"));
+  EXPECT_EQ(platform_.defaults.value(kSuite, "key"), plist::Value(now()));
+  EXPECT_TRUE(Worker::hasRunInTimeframe(60, "key"));
+  EXPECT_FALSE(Worker::hasRunInTimeframe(60, "other key"));
+  EXPECT_FALSE(Worker::hasRunInTimeframe(0, "key"));
+}
+
+TEST_F(TattleWorker, AStopBehindItsSessionNamesNoReporter) {
+  auto session = startedSession();
+  TarnReportingSessionTattleWorker worker(session, 1);
+  session.reset();
+  worker.stop();
+  EXPECT_EQ(lastLine(LogLevel::Debug), "Resetting hasRun to false. reporterID=0");
+}
+
+TEST_F(TattleWorker, WithoutItsSessionOrTheServiceNothingIsPrompted) {
+  auto session = startedSession();
+  TarnReportingSessionTattleWorker worker(session, 1);
+  const auto handle = [&](double after) {
+    worker.handleMessage(message({{"plac_invalid_x", 1}, {"tarnreporting_timestamp", now() + after}}));
+  };
+  handle(0);
+  platform_.facilities().tattle = nullptr;
+  handle(6);
+  platform_.facilities().tattle = &platform_.tattle;
+  session.reset();
+  platform_.clock.advance(10s);
+  handle(6);
+  EXPECT_EQ(prompts(), 0U);
+  EXPECT_FALSE(worker.hasRun());
 }
 
 }  // namespace

@@ -271,5 +271,15 @@ TEST_F(WattlogWorker, WithoutAPowerLogThereIsNoWorker) {
   EXPECT_TRUE(errors().empty());
 }
 
+TEST_F(WattlogWorker, WhatIsMissingIsToldBeforeTheEvent) {
+  const auto session = makeSession();
+  const auto worker = TarnReportingSessionWattlogWorker::initWithSession(session);
+  platform_.order.start();
+  worker->handleMessage(haptics({{"EngineOnTime", 1}, {"EngineState", 1}, {"Haptic_Active_Hardware_Time_Seconds", 1}}));
+  EXPECT_EQ(platform_.order.entries(), (Strings{std::string("log ") + kNoName, std::string("log ") + kNoTimestamp,
+                                                "power Loom_Haptics_EngineOnDuration",
+                                                "power Loom_Haptics_ClientStatus", "power LeakedHapticsSessionInfo"}));
+}
+
 }  // namespace
 }  // namespace tarn

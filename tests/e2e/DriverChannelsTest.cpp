@@ -129,5 +129,42 @@ TEST_F(DriverChannels, WithoutChannelsNothingIsSentAndNothingComplainedAbout) {
   EXPECT_EQ(logLines("Z error tarn"), 0U);
 }
 
+// Sound hardware as the kernel tells of it, in a folder of the test's own.
+class SoundHardware : public DriverChannels {
+ protected:
+  void played(int frames) {
+    const std::string card = folder_ + "/asound/card0";
+    fs::create_directories(card + "/pcm0p/sub0");
+    writeFile(card + "/id", "PCH\n");
+    writeFile(card + "/pcm0p/sub0/info",
+              "card: 0\ndevice: 0\nsubdevice: 0\nstream: PLAYBACK\nid: Codec\nname: Codec\n");
+    writeFile(
+        card + "/pcm0p/sub0/status",
+        "state: RUNNING\nowner_pid   : 1\ntrigger_time: 1.000000000\ntstamp      : 2.000000000\n-----\nhw_ptr      : " +
+            std::to_string(frames) + "\n");
+  }
+  // How many events a session has sent during which something was played.
+  std::size_t eventsOfASession(const std::vector<std::string>& options) {
+    played(100);
+    EXPECT_TRUE(startService(options));
+    startSession(7);
+    played(148);
+    stopSession(7);
+    ledgerAtRest();
+    return events("sys.oxbow.tarnkit.Flume.Simple").size();
+  }
+};
+
+TEST_F(SoundHardware, IsLookedAtWhereTheConfigurationNamesItsTree) {
+  writeFile(directory_ / "config.toml", "[paths]\nalsa = \"" + folder_ + "/asound\"\n");
+  ASSERT_EQ(eventsOfASession({"--config", directory_ / "config.toml"}), 1U);
+  const json payload = events("sys.oxbow.tarnkit.Flume.Simple").at(0).payload;
+  EXPECT_EQ(payload.value("PCH_Speaker_pcm0p_Simple_Codecsub0Frames", 0), 48) << payload;
+}
+
+TEST_F(SoundHardware, IsLeftAloneOtherwise) {
+  EXPECT_EQ(eventsOfASession({}), 0U);
+}
+
 }  // namespace
 }  // namespace tarn::e2e

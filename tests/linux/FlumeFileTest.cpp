@@ -208,5 +208,17 @@ TEST(FlumeFile, WhatIsBeyondTheBoundsIsLeftOut) {
   EXPECT_EQ(states(on + "," + on).complaint, "channel 1 \"a\": \"states\" must be a list of at most 1 states");
 }
 
+TEST(FlumeFile, NullIsAsGoodAsNoMember) {
+  const FlumeFileReading reading = parseFlumeFile(
+      R"({"driver": "d", "group": null, "subgroup": null, "channels": [
+          {"name": "a", "format": "simple", "unit": null, "value": 3, "more": null},
+          {"name": "b", "format": "simple", "value": null}]})");
+  ASSERT_EQ(reading.channels.size(), 1U);
+  EXPECT_EQ(reading.channels[0].name, (platform::FlumeChannelName{"d", {}, {}, "a"}));
+  EXPECT_FALSE(reading.channels[0].unit);
+  EXPECT_EQ(reading.complaint, "channel 2 \"b\": \"value\" must be a whole number");
+  EXPECT_EQ(complaintOf(R"({"driver": null, "channels": []})"), "\"driver\" must be a text");
+}
+
 }  // namespace
 }  // namespace tarn::linux_host

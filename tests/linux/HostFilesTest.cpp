@@ -26,6 +26,7 @@ TEST(HostConfiguration, EmptyFileHasEveryDefault) {
   EXPECT_FALSE(host.snare.refuse);
   EXPECT_FALSE(host.paths.diagnosticLogs);
   EXPECT_FALSE(host.paths.flume);
+  EXPECT_FALSE(host.paths.alsa);
   EXPECT_FALSE(host.paths.traceAnalysis);
   EXPECT_EQ(host.recorder.maximumMegabytes, 256U);
   EXPECT_EQ(host.recorder.maximumAgeDays, 30U);
@@ -46,6 +47,7 @@ refuse = "DailyLimitExceeded"
 [paths]
 diagnostic_logs = "/var/log/audio"
 flume = "/run/flume"
+alsa = "/proc/asound"
 trace_analysis = "/opt/analysis.so"
 [recorder]
 max_megabytes = 1
@@ -64,6 +66,7 @@ max_frame_bytes = 65536
   EXPECT_EQ(host.snare.refuse, platform::SnareReason::DailyLimitExceeded);
   EXPECT_EQ(host.paths.diagnosticLogs, "/var/log/audio");
   EXPECT_EQ(host.paths.flume, "/run/flume");
+  EXPECT_EQ(host.paths.alsa, "/proc/asound");
   EXPECT_EQ(host.paths.traceAnalysis, "/opt/analysis.so");
   EXPECT_EQ(host.recorder.maximumMegabytes, 1U);
   EXPECT_EQ(host.recorder.maximumAgeDays, 7U);
@@ -90,6 +93,7 @@ TEST(HostConfiguration, WrongTypesAreErrorsWithTheirLine) {
   EXPECT_EQ(errorOf("[rtc]\nno_backends = \"no\"\n"), "c.toml:2: \"rtc.no_backends\" must be true or false");
   EXPECT_EQ(errorOf("[snare]\nrefuse = false\n"), "c.toml:2: \"snare.refuse\" must be a text");
   EXPECT_EQ(errorOf("[paths]\nflume = 1\n"), "c.toml:2: \"paths.flume\" must be a folder's path");
+  EXPECT_EQ(errorOf("[paths]\nalsa = true\n"), "c.toml:2: \"paths.alsa\" must be a folder's path");
   EXPECT_EQ(errorOf("[paths]\ndiagnostic_logs = \"\"\n"),
             "c.toml:2: \"paths.diagnostic_logs\" must be a folder's path");
   EXPECT_EQ(errorOf("[paths]\ntrace_analysis = []\n"), "c.toml:2: \"paths.trace_analysis\" must be a file's path");

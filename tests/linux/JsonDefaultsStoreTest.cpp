@@ -262,5 +262,14 @@ TEST_F(JsonDefaults, ManySuitesAreReadThoughFewAreKeptInMemory) {
   }
 }
 
+TEST_F(JsonDefaults, NullIsAsGoodAsNoMember) {
+  ASSERT_TRUE(store_.setValue(kSuite, "kept", 1));
+  folder_.write(kFile, R"({"kept": 1, "gone": null, "list": {"inner": null, "other": 2}})");
+  EXPECT_EQ(store_.value(kSuite, "kept"), plist::Value(1));
+  EXPECT_FALSE(store_.value(kSuite, "gone").present());
+  EXPECT_EQ(store_.value(kSuite, "list"), plist::Value(plist::Dictionary{{"other", 2}}));
+  EXPECT_TRUE(faults().empty());
+}
+
 }  // namespace
 }  // namespace tarn::linux_host

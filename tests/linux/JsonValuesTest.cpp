@@ -60,6 +60,19 @@ TEST(JsonValues, NullIsAFaultWithItsPlace) {
   EXPECT_EQ(faultOf("{\n  \"a\": null\n}"), "2:11: null is not allowed here");
 }
 
+TEST(JsonValues, NullMemberIsAbsentToThoseWhoWantIt) {
+  const auto read = [](std::string_view text) { return readJson(text, kMaximumJsonNesting, JsonNull::Absent); };
+  const JsonReading reading = read("{\"a\": null,\n\"b\": {\"c\": null, \"d\": 1},\n\"e\": null,\n\"f\": 2}");
+  ASSERT_FALSE(reading.fault);
+  EXPECT_EQ(reading.value, plist::Value(plist::Dictionary{{"b", plist::Dictionary{{"d", 1}}}, {"f", 2}}));
+  EXPECT_EQ(reading.memberLines, (std::vector<std::size_t>{2, 4}));
+  EXPECT_EQ(read("{\"a\": null}").value, plist::Value(plist::Dictionary()));
+  for (const char* text : {"null", "[null]", R"({"a": [null]})"}) {
+    ASSERT_TRUE(read(text).fault) << text;
+    EXPECT_EQ(read(text).fault->text, "null is not allowed here");
+  }
+}
+
 TEST(JsonValues, MemberGivenTwiceIsAFault) {
   EXPECT_EQ(faultOf(R"({"a": 1, "a": 2})"), "1:16: a member stands twice in the object that ends here");
 }

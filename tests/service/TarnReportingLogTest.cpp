@@ -107,6 +107,12 @@ TEST_F(TarnReportingLogTest, LongestDoubleFitsBehindF) {
   EXPECT_EQ(formatted("%f", -std::numeric_limits<double>::max()).size(), 1U + 309U + 7U);
 }
 
+TEST_F(TarnReportingLogTest, NotANumberHasNoSign) {
+  const double nan = std::numeric_limits<double>::quiet_NaN();
+  EXPECT_EQ(formatted("%f %f %@ %@", nan, -nan, nan, -nan), "nan nan nan nan");
+  EXPECT_EQ(formatted("%f", -std::numeric_limits<double>::infinity()), "-inf");
+}
+
 TEST_F(TarnReportingLogTest, TextsPrintAsTheyAre) {
   EXPECT_EQ(formatted("%@ %s %@", "one", std::string("two"), std::string_view("100%@")), "one two 100%@");
 }

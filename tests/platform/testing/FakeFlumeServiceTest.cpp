@@ -137,5 +137,17 @@ TEST(FakeFlumeService, AStepFailsWithACodeOrWithNothing) {
   EXPECT_FALSE(service.copyChannels("Haptics", {}).failed());
 }
 
+TEST(FakeFlumeService, ASubscriptionSamplesNoChannelThatItDoesNotCover) {
+  FakeFlumeService service;
+  service.setChannel(channel("Haptics", "Stats", "a"));
+  service.setChannel(channel("Haptics", "Stats", "b"));
+  service.refuseSubscription(channel("Haptics", "Stats", "a").name);
+  const auto asked = service.copyChannels("Haptics", {}).value;
+  const auto subscribed = service.subscribe(*asked);
+  EXPECT_EQ(asked->size(), 2U);
+  EXPECT_EQ(subscribed.channels->size(), 1U);
+  EXPECT_EQ(service.createSamples(*subscribed.subscription, *asked).value->size(), 1U);
+}
+
 }  // namespace
 }  // namespace tarn::testing
