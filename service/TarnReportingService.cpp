@@ -43,18 +43,23 @@ plist::Array descriptions(const TarnReportingServiceDelegateProtocol::Sessions& 
   return texts;
 }
 
+plist::ValueView nameOf(const TarnReportingClientServerInstance& client) {
+  const std::string& name = client.clientProcessName();
+  return name.empty() ? plist::ValueView() : plist::ValueView(name);
+}
+
 // Whole seconds since the client's start date, -1 without one.
 std::int64_t uptimeOf(const TarnReportingClientServerInstance& client) {
   const std::optional<double> start = client.clientStartDate();
   if (!start) {
     log(LogLevel::Default, "clientStartDate is nil. clientpid=%d clientprocessname=%@", client.processIdentifier(),
-        client.clientProcessName());
+        nameOf(client));
     return -1;
   }
   const double interval = TarnReportingFacilities().clock.epochSeconds() - *start;
   if (interval < 0) {
     log(LogLevel::Default, "clientStartDate is in the past. clientpid=%d clientprocessname=%@",
-        client.processIdentifier(), client.clientProcessName());
+        client.processIdentifier(), nameOf(client));
   }
   return plist::ValueView(std::abs(interval)).asInt64();
 }
@@ -113,7 +118,7 @@ void TarnReportingService::handleInvalidation(const std::weak_ptr<TarnReportingC
   client->handleConnectionError();
   const std::int64_t uptime = uptimeOf(*client);
   const std::string& name = client->clientProcessName();
-  log(LogLevel::Default, "invalidationHandler: connection exited process=%@ uptime_sec=%d", name, uptime);
+  log(LogLevel::Default, "invalidationHandler: connection exited process=%@ uptime_sec=%d", nameOf(*client), uptime);
   if (name.empty()) {
     log(LogLevel::Default, "clientProcessName is nil. clientpid=%d", client->processIdentifier());
     return;

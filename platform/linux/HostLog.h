@@ -21,6 +21,9 @@ inline constexpr platform::LogCategory kTraceCategory{"sys.oxbow.tarnkit", "tarn
 void hostLog(platform::Log& log, const platform::LogCategory& category, platform::LogLevel level,
              std::string_view module, std::string_view text, int line = __builtin_LINE());
 
+// The text with the prefix of its module and line, as every line has it.
+std::string prefixed(std::string_view module, std::string_view text, int line = __builtin_LINE());
+
 // ": " and the text of an errno value, for the end of a line.
 std::string errorSuffix(int error);
 

@@ -39,8 +39,11 @@ void JournalLog::write(const platform::LogEntry& entry) noexcept {
     const std::lock_guard lock(mutex_);
     int error = 0;
     if (lost_ > 0) {
-      const std::string text = std::to_string(lost_) + " log entries were lost" + errorSuffix(lostError_);
-      error = sendEntry({kHostCategory, platform::LogLevel::Error, {}, 0, text});
+      constexpr std::string_view kModule = "JournalLog";
+      constexpr int kLine = __LINE__;
+      const std::string text =
+          prefixed(kModule, std::to_string(lost_) + " log entries were lost" + errorSuffix(lostError_), kLine);
+      error = sendEntry({kHostCategory, platform::LogLevel::Error, kModule, kLine, text});
       lost_ = error == 0 ? 0 : lost_;
     }
     if (error == 0) {

@@ -49,7 +49,8 @@ std::uint64_t LineLog::lostLines() const {
 }
 
 int LineLog::writeLost() {
-  const std::string text = std::to_string(lost_) + " log lines were lost" + errorSuffix(lostError_);
+  const std::string text =
+      prefixed("LineLog", std::to_string(lost_) + " log lines were lost" + errorSuffix(lostError_));
   const int error = writeWhole(logLine(clock_.epochSeconds(), {kHostCategory, platform::LogLevel::Error, {}, 0, text}));
   if (error == 0) {
     lost_ = 0;

@@ -97,6 +97,7 @@ TEST_F(Operations, OnlyItsOwnClientConfiguresStopsAndDestroysASession) {
   const auto replies = play(R"({"op":"createReportingSession","client":"a","reporterID":1}
 {"op":"startReportingSessionForID","client":"a","reporterID":1}
 {"op":"setServiceType","client":"b","reporterID":1,"serviceType":"alarms"}
+{"op":"getAllReporters","client":"b"}
 {"op":"setConfiguration","client":"b","reporterID":1,"configuration":{"HostApplicationDisplayID":"stolen"}}
 {"op":"stopReportingSessionForID","client":"b","reporterID":1}
 {"op":"destroyReportingSession","client":"b","reporterID":1}
@@ -104,7 +105,8 @@ TEST_F(Operations, OnlyItsOwnClientConfiguresStopsAndDestroysASession) {
 {"op":"sendMessage","client":"b","reporterIDs":[1],"category":"Input","type":"Start","message":{}}
 {"op":"stopReportingSessionForID","client":"a","reporterID":1}
 )");
-  EXPECT_EQ(replyTo(replies, 7).at("result"), (json{{"reporterID", 1}, {"serviceType", 65535}}));
+  EXPECT_EQ(replyTo(replies, 4).at("result"), json::array({1}));  // retyping made no session of b's own
+  EXPECT_EQ(replyTo(replies, 8).at("result"), (json{{"reporterID", 1}, {"serviceType", 65535}}));
   const auto summaries = eventsOnceThereAre(1, "sys.oxbow.tarnkit.Session_Generic.Summary");
   ASSERT_EQ(summaries.size(), 1U);
   EXPECT_EQ(summaries[0].payload.at("num_messages"), 1);

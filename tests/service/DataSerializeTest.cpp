@@ -59,6 +59,19 @@ TEST(DataSerialize, WritesDatesInWholeSecondsOfUtc) {
                                                          "</array>\n"));
 }
 
+TEST(DataSerialize, WritesTheFirstAndTheLastSecondOfTheCalendar) {
+  const plist::Array value{plist::Date{-62135596800.0}, plist::Date{253402300799.5}};
+  EXPECT_EQ(DataSerialize::getPlistBlob(value), document("<array>\n"
+                                                         "\t<date>0001-01-01T00:00:00Z</date>\n"
+                                                         "\t<date>9999-12-31T23:59:59Z</date>\n"
+                                                         "</array>\n"));
+}
+
+TEST(DataSerialize, OneValueThatXmlCannotHoldYieldsNothingAtAnyDepth) {
+  const plist::Array broken{1, "\x1B", 2};
+  EXPECT_EQ(DataSerialize::getPlistBlob(plist::Dictionary{{"a", plist::Array{broken}}, {"b", 1}}), std::nullopt);
+}
+
 TEST(DataSerialize, WritesDataInBase64) {
   const plist::Array value{plist::DataView{"hello"}};
   EXPECT_EQ(DataSerialize::getPlistBlob(value), document("<array>\n\t<data>aGVsbG8=</data>\n</array>\n"));
@@ -101,7 +114,8 @@ TEST(DataSerialize, TextsThatXmlCannotHoldYieldNothing) {
 }
 
 TEST(DataSerialize, DatesOutsideTheCalendarYieldNothing) {
-  for (const double seconds : {-62135596801.0, 253402300800.0, std::numeric_limits<double>::quiet_NaN(), 1e300}) {
+  for (const double seconds :
+       {-62135596800.5, -62135596801.0, 253402300800.0, std::numeric_limits<double>::quiet_NaN(), 1e300}) {
     EXPECT_EQ(DataSerialize::getPlistBlob(plist::Array{plist::Date{seconds}}), std::nullopt) << seconds;
   }
 }

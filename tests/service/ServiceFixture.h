@@ -127,6 +127,17 @@ class ServiceFixture : public ::testing::Test {
   std::shared_ptr<TarnReportingSession> sessionOf(std::size_t client, std::int64_t reporterID) const {
     return service_->getAllClients().at(client)->clientReportingSessionMap().find(reporterID);
   }
+  // The lines of a log category since the log was last cleared: "level text".
+  std::vector<std::string> lines(std::string_view category) const {
+    static constexpr const char* kLevels[] = {"debug ", "info ", "default ", "error "};
+    std::vector<std::string> found;
+    for (const auto& entry : platform_.log.entries()) {
+      if (entry.category == category) {
+        found.push_back(kLevels[static_cast<std::size_t>(entry.level)] + entry.message());
+      }
+    }
+    return found;
+  }
   // How many events of this name the analytics service got.
   std::size_t events(std::string_view name) const { return platform_.tally.payloads(name).size(); }
 

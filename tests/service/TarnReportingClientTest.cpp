@@ -124,6 +124,170 @@ TEST_F(RemoteOperations, TypeOfAnUnknownSessionAndOfIDZeroIsAnsweredWithSuccess)
   EXPECT_EQ(service_->sessionCount(), 0U);
 }
 
+TEST_F(RemoteOperations, TypeOfAnotherClientsSessionIsNotChanged) {
+  const Client other = connect(42);
+  create(client_, 10);
+  const auto session = sessionOf(0, 10);
+  retype(other, 4, 10);
+  EXPECT_EQ(sessionOf(0, 10), session);
+  EXPECT_EQ(session->serviceType(), AudioServiceType::Unknown);
+  EXPECT_EQ(sessionOf(1, 10), nullptr);  // nor is one of the caller's own made
+  EXPECT_EQ(serviceType(other, 10), 65535);
+}
+
+TEST_F(RemoteOperations, TypeThatIsEqualLeavesAStartedSessionRunning) {
+  create(client_, 10);
+  retype(client_, 1, 10);
+  start(client_, 10, held_);
+  retype(client_, 1, 10);
+  EXPECT_TRUE(sessionOf(0, 10)->started());
+  stop(client_, 10);
+  EXPECT_EQ(held_.count, 1);
+}
+
+TEST_F(RemoteOperations, DestroyReachesOnlyTheClientsOwnSessions) {
+  const Client other = connect(42);
+  create(client_, 10);
+  start(client_, 10, held_);
+  destroy(other, 10);
+  EXPECT_TRUE(sessionOf(0, 10)->started());
+}
+
+TEST_F(RemoteOperations, SessionUnderIDZeroIsConfiguredAndNeverTypedStartedOrTold) {
+  create(client_, 0);
+  configure(client_, {{"a", 1}}, 0);
+  EXPECT_EQ(sessionOf(0, 0)->configuration(), (plist::Dictionary{{"a", 1}}));
+  retype(client_, 4, 0);
+  EXPECT_EQ(sessionOf(0, 0)->serviceType(), AudioServiceType::Unknown);
+  start(client_, 0, held_);
+  EXPECT_EQ(held_.count, 1);
+  EXPECT_FALSE(sessionOf(0, 0)->started());
+  send(client_, {{"a", 1}}, std::vector<std::int64_t>{0});
+  EXPECT_EQ(sessionOf(0, 0)->totalMessageCount(), 0);
+  sessionOf(0, 0)->setServiceType(AudioServiceType::Alarms);
+  EXPECT_EQ(serviceType(client_, 0), 65535);
+  sessionOf(0, 0)->start();
+  stop(client_, 0);
+  EXPECT_TRUE(sessionOf(0, 0)->started());
+  destroy(client_, 0);
+  EXPECT_EQ(service_->sessionCount(), 0U);
+}
+
+TEST_F(RemoteOperations, LowestReporterIDIsOneLikeEveryOther) {
+  constexpr std::int64_t kLowest = INT64_MIN;
+  create(client_, kLowest);
+  retype(client_, 2, kLowest);
+  start(client_, kLowest, held_);
+  EXPECT_FALSE(send(client_, {{"a", 1}}, std::vector<std::int64_t>{kLowest}));
+  EXPECT_EQ(sessionOf(0, kLowest)->totalMessageCount(), 1);
+  Answer<plist::Dictionary> answer;
+  client_.remote().reporterID(kLowest, answer.reply());
+  platform_.runUntilIdle();
+  EXPECT_EQ(answer.result, (plist::Dictionary{{"reporterID", kLowest}, {"serviceType", 2}}));
+  stop(client_, kLowest);
+  EXPECT_EQ(held_.count, 1);
+  EXPECT_TRUE(platform_.log.contains("stopping session for reporter -9223372036854775808"));
+  destroy(client_, kLowest);
+  EXPECT_EQ(service_->sessionCount(), 0U);
+}
+
+TEST_F(RemoteOperations, StartReplyIsSentOnce) {
+  create(client_, 10);
+  start(client_, 10, held_);
+  stop(client_, 10);
+  stop(client_, 10);
+  EXPECT_EQ(held_.count, 1);
+  Answer<bool> second;
+  start(client_, 10, second);
+  EXPECT_EQ(second.count, 0);
+  stop(client_, 10);
+  EXPECT_EQ(held_.count, 1);
+  EXPECT_EQ(second.count, 1);
+  EXPECT_TRUE(second.result);
+}
+
+TEST_F(RemoteOperations, StartSendsTheReplyThatAnEarlierStartLeft) {
+  create(client_, 10);
+  start(client_, 10, held_);
+  sessionOf(0, 10)->stop();  // not by its client
+  EXPECT_EQ(held_.count, 0);
+  Answer<bool> second;
+  start(client_, 10, second);
+  EXPECT_EQ(held_.count, 1);
+  EXPECT_TRUE(held_.result);
+  EXPECT_FALSE(held_.error);
+  EXPECT_EQ(second.count, 0);
+}
+
+TEST_F(RemoteOperations, StartOfATestSessionIsHeldOutsideInternalBuilds) {
+  create(client_, 10);
+  retype(client_, 11, 10);
+  start(client_, 10, held_);
+  EXPECT_EQ(held_.count, 0);
+}
+
+TEST_F(RemoteOperations, MessageKeepsItsCategoryAndTypeInEverySession) {
+  create(client_, 10);
+  create(client_, 11);
+  client_.remote().sendMessage({{"a", 1}}, 0x20000003, 65535, std::vector<std::int64_t>{10, 11},
+                               [](const std::optional<platform::RemoteError>&) {});
+  platform_.runUntilIdle();
+  for (const std::int64_t id : {10, 11}) {
+    const auto& record = *sessionOf(0, id)->messages().at(0);
+    EXPECT_EQ(static_cast<std::uint32_t>(record.category()), 0x20000003U);
+    EXPECT_EQ(record.type(), AudioEventType::Unknown);
+    EXPECT_EQ(record.message()["a"].asInt64(), 1);
+  }
+}
+
+TEST_F(RemoteOperations, SessionThatIsReplacedKeepsItsPlaceInTheListOfReporters) {
+  create(client_, 10);
+  create(client_, 3);
+  create(client_, 10);
+  Answer<std::vector<std::int64_t>> answer;
+  client_.remote().getAllReporters(answer.reply());
+  platform_.runUntilIdle();
+  EXPECT_EQ(answer.result, (std::vector<std::int64_t>{10, 3}));
+  destroy(client_, 10);
+  create(client_, 10);
+  client_.remote().getAllReporters(answer.reply());
+  platform_.runUntilIdle();
+  EXPECT_EQ(answer.result, (std::vector<std::int64_t>{3, 10}));
+}
+
+TEST_F(RemoteOperations, LossStopsTheSessionsThatRunAndLetsGoOfAll) {
+  create(client_, 10);
+  create(client_, 11);
+  start(client_, 10, held_);
+  const auto instance = service_->getAllClients().at(0);
+  const auto running = sessionOf(0, 10);
+  client_.connection->invalidate();
+  platform_.runUntilIdle();
+  EXPECT_FALSE(running->started());
+  EXPECT_TRUE(platform_.log.contains("ending session. reporterID=10"));
+  EXPECT_FALSE(platform_.log.contains("stop called. reporterID=11"));
+  EXPECT_EQ(instance->clientReportingSessionMap().size(), 0U);
+  EXPECT_EQ(instance->clientReportingSessionMap().find(10), nullptr);
+  EXPECT_EQ(held_.count, 0);
+}
+
+TEST_F(RemoteOperations, OperationsThatComeAfterTheServicesEndAreAnsweredWithoutIt) {
+  create(client_, 10);
+  service_.reset();
+  EXPECT_EQ(serviceType(client_, 99), 65535);
+  Answer<std::vector<std::int64_t>> all;
+  client_.remote().getAllReporters(all.reply());
+  platform_.runUntilIdle();
+  EXPECT_EQ(all.count, 1);
+  EXPECT_TRUE(all.result.empty());
+  const auto error = send(client_, {{"a", 1}}, std::vector<std::int64_t>{10});
+  ASSERT_TRUE(error);
+  EXPECT_EQ(error->code, 1);
+  start(client_, 10, held_);
+  stop(client_, 10);
+  EXPECT_EQ(held_.count, 1);
+}
+
 TEST_F(RemoteOperations, TypeOfASessionIsToldAcrossClients) {
   const Client other = connect(42);
   create(client_, 10);
@@ -188,6 +352,7 @@ TEST_F(RemoteOperations, MessageWhileReportingIsDisabledIsRefusedWithTheOneError
   ASSERT_TRUE(error);
   EXPECT_EQ(error->domain, "sys.oxbow.audio.reporting");
   EXPECT_EQ(error->code, 1);
+  EXPECT_EQ(error->text, "reporting is disabled");
   EXPECT_EQ(sessionOf(0, 10)->totalMessageCount(), 0);
 }
 
@@ -239,6 +404,23 @@ TEST_F(InternalBuildOperations, MessageWithoutASessionIsMarked) {
   create(client, 10);
   send(client, {{"a", 1}}, std::vector<std::int64_t>{10});
   EXPECT_FALSE(platform_.tally.events().back().payload.contains("sendSingleMessage"));
+}
+
+TEST_F(InternalBuildOperations, MessageWithAnEmptyListIsMarkedAsOneWithoutAList) {
+  send(connect(41), {{"a", 1}}, platform::ReporterIDs(std::in_place));
+  const plist::Dictionary payload = platform_.tally.events().at(0).payload;
+  EXPECT_EQ(payload["sendSingleMessage"].kind(), plist::Kind::Bool);
+  EXPECT_TRUE(payload["sendSingleMessage"].asBool());
+}
+
+TEST_F(InternalBuildOperations, MessageThatCameWhileReportingWasDisabledIsNotMarked) {
+  const Client client = connect(41);
+  service_->setReportingEnabled(false);
+  client.remote().sendMessage({{"a", 1}}, 4, 1, std::nullopt, [](const std::optional<platform::RemoteError>&) {});
+  service_->setReportingEnabled(true);
+  platform_.runUntilIdle();
+  ASSERT_FALSE(platform_.tally.events().empty());
+  EXPECT_FALSE(platform_.tally.events().at(0).payload.contains("sendSingleMessage"));
 }
 
 TEST_F(InternalBuildOperations, StartOfATestSessionIsAnsweredAtOnceAndAtTheStop) {

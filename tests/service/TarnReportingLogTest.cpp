@@ -113,6 +113,22 @@ TEST_F(TarnReportingLogTest, NotANumberHasNoSign) {
   EXPECT_EQ(formatted("%f", -std::numeric_limits<double>::infinity()), "-inf");
 }
 
+TEST_F(TarnReportingLogTest, ModuleOfJustTheColumnsWidthAndLineOfFiveDigitsHaveNoFurtherBlank) {
+  TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Info, "TarnReportingSessionMessa", LogText("text", 12345));
+  EXPECT_EQ(platform_.log.texts().back(), "TarnReportingSessionMessa:12345 text");
+  TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Info, "TarnReportingSessionMess", LogText("text", 1234));
+  EXPECT_EQ(platform_.log.texts().back(), " TarnReportingSessionMess:1234  text");
+}
+
+TEST_F(TarnReportingLogTest, ThePrefixCountsTowardsTheLimitOfALine) {
+  TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Info, "Module", LogText("%@", 1),
+                   std::string(65536 - 32, 'x'));
+  EXPECT_EQ(platform_.log.texts().back().size(), 65536U);
+  TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Info, "Module", LogText("%@", 1),
+                   std::string(65536 - 31, 'x'));
+  EXPECT_TRUE(platform_.log.texts().back().ends_with("x ... (1 more bytes)"));
+}
+
 TEST_F(TarnReportingLogTest, TextsPrintAsTheyAre) {
   EXPECT_EQ(formatted("%@ %s %@", "one", std::string("two"), std::string_view("100%@")), "one two 100%@");
 }

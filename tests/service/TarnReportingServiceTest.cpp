@@ -214,8 +214,8 @@ TEST_F(TarnReportingServiceTest, UptimeIsNeverNegative) {
 TEST_F(TarnReportingServiceTest, UptimeOfAClientThatWasNeverListedIsMinusOne) {
   const auto connection = platform_.listener.connect(41);
   connection->invalidate();  // before the work that sets the start date and the name
-  EXPECT_TRUE(platform_.log.contains("clientStartDate is nil. clientpid=41 clientprocessname="));
-  EXPECT_TRUE(platform_.log.contains("invalidationHandler: connection exited process= uptime_sec=-1"));
+  EXPECT_TRUE(platform_.log.contains("clientStartDate is nil. clientpid=41 clientprocessname=(null)"));
+  EXPECT_TRUE(platform_.log.contains("invalidationHandler: connection exited process=(null) uptime_sec=-1"));
   EXPECT_TRUE(platform_.log.contains("clientProcessName is nil. clientpid=41"));
   EXPECT_EQ(events(kUptime), 0U);
   platform_.runUntilIdle();

@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <cmath>
+#include <limits>
 #include <thread>
 #include <vector>
 
@@ -55,6 +56,15 @@ TEST_F(TarnReportingUtilityTest, WaitReturnsTrueOnceTheBackEndSignals) {
   EXPECT_TRUE(wait(5));
   EXPECT_EQ(platform_.log.messages(), (std::vector<std::string>{"waiting for the answer", "continuing"}));
   EXPECT_EQ(platform_.log.entries()[1].level, LogLevel::Info);
+}
+
+TEST_F(TarnReportingUtilityTest, WaitThatTimedOutIsFalseEvenWhenTheFlagWasSetMeanwhile) {
+  platform_.conditions.onWait([this](auto) {
+    flag_ = true;  // and nobody signalled
+    return WaitOutcome::TimesOut;
+  });
+  EXPECT_FALSE(wait(5));
+  EXPECT_EQ(platform_.log.messages(), (std::vector<std::string>{"waiting for the answer", "no answer came"}));
 }
 
 TEST_F(TarnReportingUtilityTest, WakeUpWithoutTheFlagWaitsTheWholeTimeAnew) {
@@ -135,6 +145,20 @@ TEST_F(TarnReportingUtilityTest, ProcessorTimeIsComputedInSinglePrecision) {
 TEST_F(TarnReportingUtilityTest, ProcessorTimeBeyondThirtyTwoBitsIsHeldToThem) {
   platform_.clock.setProcessorTicks(INT64_MAX);
   EXPECT_EQ(TarnReportingUtilityAddDates({}).get("processuptime_ms").asInt64(), INT32_MAX);
+}
+
+TEST_F(TarnReportingUtilityTest, UptimeIsRoundedToTheNearestSecondAndHeldToThirtyTwoBits) {
+  const std::pair<double, std::int64_t> uptimes[] = {{100.49, 100},    {100.5, 101},      {-0.5, -1},
+                                                     {3e9, INT32_MAX}, {-3e9, INT32_MIN}, {std::nan(""), 0}};
+  for (const auto& [uptime, seconds] : uptimes) {
+    platform_.clock.setSystemUptimeSeconds(uptime);
+    EXPECT_EQ(TarnReportingUtilityAddDates({}).get("systemuptime_sec").asInt64(), seconds) << uptime;
+  }
+}
+
+TEST_F(TarnReportingUtilityTest, LogsDirectoryLiesUnderTheDiagnosticLogs) {
+  EXPECT_EQ(TarnReportingLogsDirectory(),
+            platform_.fileSystem.wellKnownDirectory(platform::WellKnownDirectory::DiagnosticLogs) + "/Audio/Reporting");
 }
 
 TEST_F(TarnReportingUtilityTest, ServerQueueIsMadeOnceWithItsNameAndTheHighestQuality) {
@@ -249,6 +273,19 @@ TEST(TarnReportingUtilityBuckets, NegativeNumbersKeepTheirSign) {
 
 TEST(TarnReportingUtilityBuckets, NegativePlacesCountAsOneDecimal) {
   EXPECT_EQ(bucketLabel(0, {12.34}, -2), "12.3");
+}
+
+TEST(TarnReportingUtilityBuckets, NumbersThatAreNotFiniteHaveTheirSigns) {
+  const double infinity = std::numeric_limits<double>::infinity();
+  EXPECT_EQ(bucketLabel(0, {std::nan("")}, 1), "NaN");
+  EXPECT_EQ(bucketLabel(0, {infinity}, 1), "\xE2\x88\x9E");
+  EXPECT_EQ(bucketLabel(0, {-infinity}, 1), "-\xE2\x88\x9E");
+  EXPECT_EQ(bucketLabel(std::nan(""), {0, 5, 10}, 0), "10");  // no distance is ever greater
+}
+
+TEST(TarnReportingUtilityBuckets, SmallestNumberShowsAllItsPlaces) {
+  EXPECT_EQ(bucketLabel(0, {5e-324}, 330), "0." + std::string(323, '0') + "5");
+  EXPECT_EQ(bucketLabel(0, {5e-324}, 323), "0.0");
 }
 
 TEST(TarnReportingUtilityKeyChange, NeedsBothDictionariesAndTheKeyInBoth) {

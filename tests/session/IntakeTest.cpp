@@ -50,6 +50,20 @@ TEST_F(Intake, TimeStampThatIsNoNumberIsKeptAsInvalid) {
   EXPECT_EQ(payload["tarnreporting_timestamp"].doubleValue(), now());
 }
 
+TEST_F(Intake, StampIsLookedForBeforeBlanksAreReplaced) {
+  const plist::Dictionary payload = sent(makeSession(), {{"tarnreporting timestamp", now() - 5}});
+  EXPECT_EQ(payload["invalid_timestamp"].text(), "nil");
+  EXPECT_EQ(payload["tarnreporting_timestamp"].doubleValue(), now() - 5);
+}
+
+TEST_F(Intake, MessageThatIsStampedKeepsItsPayloadOtherwise) {
+  EXPECT_EQ(sent(makeSession(), {{"tarnreporting_timestamp", now() - 1}, {"a", 1}}),
+            (plist::Dictionary{{"tarnreporting_timestamp", now() - 1},
+                               {"a", 1},
+                               {"audiotag", "PlaybackStart"},
+                               {"HostApplicationDisplayID", "Unknown"}}));
+}
+
 TEST_F(Intake, KeyWithABlankReplacesTheKeyWithAnUnderscore) {
   const plist::Dictionary payload = sent(makeSession(), {{"a b", "with blank"}, {"a_b", "without"}});
   EXPECT_EQ(payload["a_b"].text(), "with blank");
@@ -210,6 +224,76 @@ TEST_F(Intake, MessageAddressedToAnEmptyListReachesEveryConsumer) {
   EXPECT_EQ(trail(), (std::vector<std::string>{"EarlyWorker handle", "ConsumerWorker handle"}));
 }
 
+TEST_F(Intake, RedundantMessageIsWithheldAlsoFromTheWorkersThatItIsAddressedTo) {
+  useWorkers<EarlyWorker, ConsumerWorker>();
+  const auto session = makeSession();
+  session->start();
+  session->sendMessage(message(stamped({{"a", 1}})));
+  trail().clear();
+  const auto repeated = message(stamped({{"a", 1}}));
+  repeated->setDestinationWorkers({"ConsumerWorker"});
+  session->sendMessage(repeated);
+  EXPECT_TRUE(repeated->isRedundant());
+  EXPECT_EQ(trail(), std::vector<std::string>{});  // the one that asks for such isn't addressed
+  const auto toTheOther = message(stamped({{"a", 1}}));
+  toTheOther->setDestinationWorkers({"EarlyWorker"});
+  session->sendMessage(toTheOther);
+  EXPECT_EQ(trail(), std::vector<std::string>{"EarlyWorker handle"});
+}
+
+TEST_F(Intake, RedundantMessageIsWithheldFromAWorkerThatSaysNo) {
+  auto row = TarnReportingSessionWorkerClass::of<EarlyWorker>();
+  row.handleRedundantMessages = [](TarnReportingSessionWorkerProtocol&) { return false; };
+  useWorkers({row});
+  const auto session = makeSession();
+  trail().clear();
+  session->sendMessage(message(stamped({{"a", 1}})));
+  session->sendMessage(message(stamped({{"a", 1}})));
+  EXPECT_EQ(trail(), std::vector<std::string>{"EarlyWorker handle"});
+}
+
+TEST_F(Intake, SameMessageInTheNextPeriodIsNew) {
+  useWorkers<ConsumerWorker>();
+  const auto session = makeSession();
+  for (int period = 0; period < 2; ++period) {
+    session->start();
+    const auto record = message(stamped({{"a", 1}}));
+    session->sendMessage(record);
+    EXPECT_FALSE(record->isRedundant());
+    session->stop();
+  }
+}
+
+TEST_F(Intake, CategoryAndTypeAreToldApart) {
+  const auto session = makeSession();
+  const auto send = [&](std::uint32_t category, std::uint16_t type) {
+    const auto record =
+        message(stamped({{"a", 1}}), static_cast<AudioEventCategory>(category), static_cast<AudioEventType>(type));
+    session->sendMessage(record);
+    return record->isRedundant();
+  };
+  EXPECT_FALSE(send(1, 0));
+  EXPECT_FALSE(send(0, 0x8000));
+  EXPECT_FALSE(send(2, 0));
+  EXPECT_FALSE(send(0x10001, 0));
+  EXPECT_FALSE(send(0, 1));
+  // Each is compared with its own, and not with one whose numbers share bits with it.
+  EXPECT_TRUE(send(1, 0));
+  EXPECT_TRUE(send(0, 0x8000));
+  EXPECT_TRUE(send(2, 0));
+  EXPECT_TRUE(send(0x10001, 0));
+  EXPECT_TRUE(send(0, 1));
+}
+
+TEST_F(Intake, EpochTimeIsTheStampAsANumberOrZero) {
+  const auto epochTime = [](plist::Dictionary payload) {
+    return TarnReportingSession::getEpochTimeFromTarnReportingStateMessage(*message(std::move(payload)));
+  };
+  EXPECT_EQ(epochTime({{"tarnreporting_timestamp", 12.5}}), 12.5);
+  EXPECT_EQ(epochTime({{"tarnreporting_timestamp", "7 s"}}), 7);
+  EXPECT_EQ(epochTime({{"a", 1}}), 0);
+}
+
 TEST_F(Intake, AllWorkersReceiveTheSameRecord) {
   useWorkers<ConsumerWorker>();
   const auto session = makeSession();
@@ -248,6 +332,17 @@ TEST_F(Intake, LogsTheMessageAsItWasTakenIn) {
   EXPECT_TRUE(platform_.log.contains(
       LogLevel::Debug,
       "TarnReportingSessionWorker action=sendMessage reporterID=7 app=Unknown redundant=NO message={a = 1; "));
+  session->sendMessage(message(stamped({{"a", 1}})));
+  EXPECT_TRUE(platform_.log.contains(LogLevel::Debug, "app=Unknown redundant=YES message={a = 1; "));
+}
+
+TEST_F(Intake, LineOfAMessageNamesTheApplicationOfTheConfiguration) {
+  const auto session = makeSession();
+  const plist::Dictionary configuration{{"HostApplicationDisplayID", "com.example.player"}};
+  session->updateConfigurationWithContentsOfConfiguration(&configuration);
+  session->sendMessage(message(stamped({{"HostApplicationDisplayID", "own"}})));
+  EXPECT_TRUE(platform_.log.contains(LogLevel::Debug, "reporterID=7 app=com.example.player redundant=NO"));
+  EXPECT_TRUE(platform_.log.contains(LogLevel::Debug, "HostApplicationDisplayID = own"));
 }
 
 }  // namespace

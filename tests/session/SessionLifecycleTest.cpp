@@ -19,8 +19,72 @@ class Observer : public TrailWorker<Observer>, public TarnReportingSessionWorker
   }
 };
 
+// Writes down at each call how many trace points there were by then.
+class PointCounter : public TarnReportingSessionWorkerProtocol, public TarnReportingSessionWorkerConsumerProtocol {
+ public:
+  static constexpr std::string_view kClassName = "PointCounter";
+  using TarnReportingSessionWorkerProtocol::TarnReportingSessionWorkerProtocol;
+  static std::unique_ptr<PointCounter> initWithSession(const std::shared_ptr<TarnReportingSession>& session) {
+    note("init");
+    return std::make_unique<PointCounter>(session);
+  }
+  static bool startOnInit() { return true; }
+  static bool start() {
+    note("start");
+    return true;
+  }
+  static void stop() { note("stop"); }
+  void handleMessage(const std::shared_ptr<TarnReportingSessionMessage>&) override { note("handle"); }
+  static inline FakeTracePoints* points = nullptr;
+
+ private:
+  static void note(const std::string& verb) {
+    trail().push_back(verb + " " + std::to_string(points->emitted().size()));
+  }
+};
+
+// Keeps the last record of the log at stop, and sends what the test wants then.
+class StopWitness : public TarnReportingSessionWorkerProtocol, public TarnReportingSessionWorkerProducerProtocol {
+ public:
+  static constexpr std::string_view kClassName = "StopWitness";
+  using TarnReportingSessionWorkerProtocol::TarnReportingSessionWorkerProtocol;
+  static std::unique_ptr<StopWitness> initWithSession(const std::shared_ptr<TarnReportingSession>& session) {
+    return std::make_unique<StopWitness>(session);
+  }
+  void stop() {
+    last = session()->messages().back();
+    total = session()->totalMessageCount();
+    if (derived) {
+      session()->sendMessage(derived);
+    }
+  }
+  static inline std::shared_ptr<TarnReportingSessionMessage> last;
+  static inline std::shared_ptr<TarnReportingSessionMessage> derived;
+  static inline std::int64_t total = 0;
+};
+
 class TarnReportingSessionTest : public SessionFixture {
  protected:
+  using Lines = std::vector<std::string>;
+
+  ~TarnReportingSessionTest() override {
+    StopWitness::last.reset();
+    StopWitness::derived.reset();
+  }
+  // The session's lines since the last call, "level text", those of its workers left out.
+  Lines takeLines() {
+    static constexpr const char* kLevels[] = {"debug ", "info ", "default ", "error "};
+    Lines lines;
+    for (const auto& entry : platform_.log.entries()) {
+      if (entry.message().find("TarnReportingSessionWorker") == std::string::npos) {
+        EXPECT_EQ(entry.category, "tarnrr");
+        EXPECT_EQ(entry.module, "TarnReportingSession");
+        lines.push_back(kLevels[static_cast<std::size_t>(entry.level)] + entry.message());
+      }
+    }
+    platform_.log.clear();
+    return lines;
+  }
   static const plist::Dictionary& logged(const std::shared_ptr<TarnReportingSession>& session, std::size_t index) {
     return session->messages().at(index)->message();
   }
@@ -166,6 +230,124 @@ TEST_F(TarnReportingSessionTest, LogsItsLifeAtTheLevelsOfEach) {
   EXPECT_TRUE(platform_.log.contains(LogLevel::Debug, "stop called. reporterID=7"));
   EXPECT_TRUE(platform_.log.contains(LogLevel::Debug, "ending session. reporterID=7"));
   EXPECT_TRUE(platform_.log.contains(LogLevel::Info, "deallocing this session 7"));
+}
+
+TEST_F(TarnReportingSessionTest, WritesTheseLinesAndNoOthers) {
+  auto session = makeSession();
+  EXPECT_EQ(takeLines(), (Lines{"info created reporting session for ID: 7"}));
+  session->setServiceType(AudioServiceType::Wisp);
+  EXPECT_EQ(takeLines(), (Lines{"info setting service type wisp"}));
+  session->stop();
+  EXPECT_EQ(takeLines(), (Lines{"debug stop called. reporterID=7"}));
+  session->start();
+  EXPECT_EQ(takeLines(),
+            (Lines{"info start called. reporterID=7", "debug self.started==false. starting. reporterID=7"}));
+  session->start();
+  EXPECT_EQ(takeLines(), (Lines{"info start called. reporterID=7", "info 7 is already started"}));
+  session->stop();
+  EXPECT_EQ(takeLines(), (Lines{"debug stop called. reporterID=7", "debug ending session. reporterID=7"}));
+  session.reset();
+  EXPECT_EQ(takeLines(), (Lines{"info deallocing this session 7"}));
+}
+
+TEST_F(TarnReportingSessionTest, LineOfTheCreationFollowsThoseOfTheEarlyWorkers) {
+  useWorkers<EarlyWorker>();
+  makeSession();
+  EXPECT_EQ(platform_.log.messages().at(0),
+            "Initializing TarnReportingSessionWorker. action=init worker=EarlyWorker reporterID=7");
+  EXPECT_EQ(platform_.log.messages().at(1), "TarnReportingSessionWorker action=added worker=EarlyWorker reporterID=7");
+  EXPECT_EQ(platform_.log.messages().at(2), "created reporting session for ID: 7");
+}
+
+TEST_F(TarnReportingSessionTest, LifeIsMarkedByTracePointsOfTheReporter) {
+  using Points = std::vector<FakeTracePoints::Point>;
+  auto session = makeSession(-9);
+  session->start();
+  session->start();
+  session->sendMessage(message({{"a", 1}}));
+  session->stop();
+  session->stop();
+  session.reset();
+  EXPECT_EQ(platform_.tracePoints.emitted(),
+            (Points{{0x21044828, -9}, {0x2104482C, -9}, {0x21044838, -9}, {0x21044830, -9}, {0x21044834, -9}}));
+}
+
+TEST_F(TarnReportingSessionTest, TracePointsStandAtTheirMoments) {
+  PointCounter::points = &platform_.tracePoints;
+  useWorkers<PointCounter, ConsumerWorker, ProducerWorker>();
+  auto session = makeSession();  // the point of the creation comes last
+  session->start();              // that of the start before its workers
+  session->sendMessage(message({{"a", 1}}));
+  session->stop();  // that of the stop before its workers; the producer's message is one of its own
+  EXPECT_EQ(trail(), (std::vector<std::string>{"init 0", "start 0", "ConsumerWorker init", "ProducerWorker init",
+                                               "ConsumerWorker start", "ProducerWorker start", "handle 3",
+                                               "ConsumerWorker handle", "ProducerWorker stop", "handle 5",
+                                               "ConsumerWorker handle", "stop 5", "ConsumerWorker stop"}));
+}
+
+TEST_F(TarnReportingSessionTest, StartIsMarkedBeforeItsWorkersAreMade) {
+  PointCounter::points = &platform_.tracePoints;
+  auto row = TarnReportingSessionWorkerClass::of<PointCounter>();
+  row.startOnInit = [] { return false; };
+  useWorkers({row});
+  const auto session = makeSession();
+  EXPECT_EQ(session->workerInstanceCount(), 0U);  // a class that says no isn't made on creation
+  session->start();
+  EXPECT_EQ(trail(), (std::vector<std::string>{"init 2", "start 2"}));
+}
+
+TEST_F(TarnReportingSessionTest, StopAppendsItsMarkerBeforeTheWorkersStop) {
+  useWorkers<StopWitness>();
+  const auto session = makeSession();
+  session->start();
+  platform_.advance(std::chrono::seconds(1));
+  session->sendMessage(message({{"a", 1}}));
+  session->sendMessage(message({{"a", 1}}));
+  session->stop();
+  ASSERT_TRUE(StopWitness::last != nullptr);
+  EXPECT_EQ(StopWitness::last->category(), AudioEventCategory::Setup);
+  EXPECT_EQ(StopWitness::last->type(), AudioEventType::Stop);
+  EXPECT_EQ(StopWitness::last->message(), (plist::Dictionary{{"method", "stop"},
+                                                             {"messages_at_stop", 2},
+                                                             {"unique_messages_at_stop", 2},
+                                                             {"reporterid", 7},
+                                                             {"running_at_stop", "YES"},
+                                                             {"invalid_timestamp", "nil"},
+                                                             {"tarnreporting_timestamp", now()},
+                                                             {"audiotag", "SetupStop"}}));
+  EXPECT_EQ(StopWitness::total, 2);  // markers don't count, and the count goes only after the workers
+}
+
+TEST_F(TarnReportingSessionTest, DerivedMessageIsComparedWithTheLatestByTime) {
+  useWorkers<StopWitness>();
+  const auto session = makeSession();
+  session->start();
+  session->sendMessage(message({{"a", "later"}, {"tarnreporting_timestamp", now() - 10}}));
+  session->sendMessage(message({{"a", "earlier"}, {"tarnreporting_timestamp", now() - 20}}));
+  StopWitness::derived = message({{"a", "later"}, {"tarnreporting_timestamp", now()}});
+  session->stop();
+  EXPECT_TRUE(StopWitness::derived->isRedundant());
+}
+
+TEST_F(TarnReportingSessionTest, ConfigurationWithoutAHostApplicationKeepsTheOneThatIsThere) {
+  const auto session = makeSession();
+  const plist::Dictionary first{{"HostApplicationDisplayID", "com.example.player"}};
+  session->updateConfigurationWithContentsOfConfiguration(&first);
+  const plist::Dictionary second{{"b", 2}};
+  session->updateConfigurationWithContentsOfConfiguration(&second);
+  EXPECT_EQ(session->configuration(),
+            (plist::Dictionary{{"HostApplicationDisplayID", "com.example.player"}, {"b", 2}}));
+}
+
+TEST_F(TarnReportingSessionTest, DescriptionNamesTheFirstProcessAndTheConfiguredApplication) {
+  const auto session = TarnReportingSession::initWithID(-1, {5, 6}, TarnReportingSession::Mode::SingleMessage);
+  session->setServiceType(AudioServiceType::Haptics);
+  const plist::Dictionary configuration{{"HostApplicationDisplayID", "com.example.player"}};
+  session->updateConfigurationWithContentsOfConfiguration(&configuration);
+  EXPECT_EQ(session->description(),
+            "reporterID=-1,serviceName=haptics,ownerPid=5,clientProcessName=(null),"
+            "HostApplicationDisplayID=com.example.player,started=0,singleMessageSession=1");
+  EXPECT_NE(TarnReportingSession::initWithID(1, {})->description().find("ownerPid=0,"), std::string::npos);
 }
 
 TEST_F(TarnReportingSessionTest, DestructionReleasesWorkersWithoutStoppingThem) {

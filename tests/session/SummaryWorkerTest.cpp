@@ -94,6 +94,43 @@ TEST_F(SummaryWorker, KeysComeInTheirOrder) {
             "load_avg_5_min load_avg_15_min invalid_timestamp tarnreporting_timestamp audiotag ");
 }
 
+TEST_F(SummaryWorker, SummaryIsThisDictionary) {
+  platform_.processFacts.setThermalState(platform::ThermalState::Fair);
+  platform_.processFacts.setPhysicalFootprint(std::uint64_t{7} << 20U);
+  platform_.processFacts.setLoadAverages({0.5, 1.5, 2.5});
+  const auto session = makeSession();
+  session->setServiceType(AudioServiceType::Haptics);
+  session->setClientProcessName("player");
+  const plist::Dictionary configuration{{"HostApplicationDisplayID", "com.example.player"}};
+  session->updateConfigurationWithContentsOfConfiguration(&configuration);
+  session->start();
+  session->sendMessage(message({{"session_duration", 3}}));
+  session->sendMessage(message({{"session_duration", 2}}));
+  const plist::Dictionary summary = summaryOf(session);
+  EXPECT_EQ(summary, (plist::Dictionary{{"total_active_time", 5.0},
+                                        {"active_count", 2},
+                                        {"overload_count", 0},
+                                        {"average_active_time", 2.5},
+                                        {"num_messages", 2},
+                                        {"num_unique_messages", 4},
+                                        {"num_redundant_messages", -2},
+                                        {"singleMessageSession", false},
+                                        {"summaryServiceName", "haptics"},
+                                        {"HostApplicationDisplayID", "com.example.player"},
+                                        {"clientProcessName", "player"},
+                                        {"thermal_state", "Fair"},
+                                        {"low_power_enabled", false},
+                                        {"vmInfo_phys_footprint_MiB", 7},
+                                        {"load_avg_1_min", 0.5},
+                                        {"load_avg_5_min", 1.5},
+                                        {"load_avg_15_min", 2.5},
+                                        {"invalid_timestamp", "nil"},
+                                        {"tarnreporting_timestamp", now()},
+                                        {"audiotag", "Session_GenericSummary"}}));
+  EXPECT_EQ(summary["singleMessageSession"].kind(), plist::Kind::Bool);
+  EXPECT_EQ(summary["total_active_time"].kind(), plist::Kind::Double);
+}
+
 TEST_F(SummaryWorker, MachineFactsComeFromThePlatform) {
   platform_.processFacts.setThermalState(platform::ThermalState::Serious);
   platform_.processFacts.setLowPowerModeEnabled(true);

@@ -64,6 +64,32 @@ TEST_F(TallyWorker, LatePayloadIsThatOfTheHandOver) {
   EXPECT_EQ(platform_.tally.events().at(0).payload["a"].asInt64(), 1);
 }
 
+TEST_F(TallyWorker, KindsWhoseNumbersShareBitsHaveTheirOwnNames) {
+  const auto session = makeSession();
+  const auto namesOf = [&](std::uint32_t category, std::uint16_t type, std::uint16_t service) {
+    session->setServiceType(static_cast<AudioServiceType>(service));
+    const std::size_t before = platform_.tally.sentNames().size();
+    session->sendMessage(
+        message({{"serial", before}}, static_cast<AudioEventCategory>(category), static_cast<AudioEventType>(type)));
+    const auto names = platform_.tally.sentNames();
+    return std::vector<std::string>(names.begin() + static_cast<std::ptrdiff_t>(before), names.end());
+  };
+  using Names = std::vector<std::string>;
+  for (int round = 0; round < 2; ++round) {  // made, then remembered
+    EXPECT_EQ(namesOf(1, 0, 0), (Names{"sys.oxbow.tarnkit.Generic.Generic", "sys.oxbow.generic.Generic.Generic"}));
+    EXPECT_EQ(namesOf(0, 0x8000, 0),
+              (Names{"sys.oxbow.tarnkit.Undefined.Generic", "sys.oxbow.generic.Undefined.Generic"}));
+    EXPECT_EQ(namesOf(2, 0, 0), (Names{"sys.oxbow.tarnkit.Record.Generic", "sys.oxbow.generic.Record.Generic"}));
+    EXPECT_EQ(namesOf(0x10000001, 0, 0),
+              (Names{"sys.oxbow.tarnkit.DSP_Generic.Generic", "sys.oxbow.generic.DSP_Generic.Generic"}));
+    EXPECT_EQ(namesOf(0, 1, 0), (Names{"sys.oxbow.tarnkit.Undefined.Start", "sys.oxbow.generic.Undefined.Start"}));
+    EXPECT_EQ(namesOf(0, 2, 0), (Names{"sys.oxbow.tarnkit.Undefined.Stop", "sys.oxbow.generic.Undefined.Stop"}));
+    EXPECT_EQ(namesOf(0, 0, 0x8000),
+              (Names{"sys.oxbow.tarnkit.Undefined.Generic", "sys.oxbow.unknown.Undefined.Generic"}));
+    EXPECT_EQ(namesOf(0, 0, 1), (Names{"sys.oxbow.tarnkit.Undefined.Generic", "sys.oxbow.wisp.Undefined.Generic"}));
+  }
+}
+
 TEST_F(TallyWorker, FloodOfKindsLeavesTheNamesRight) {
   const auto session = makeSession();
   for (std::uint32_t i = 0; i < 2000; ++i) {

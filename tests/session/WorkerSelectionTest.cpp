@@ -90,6 +90,56 @@ TEST_F(WorkerSelection, SingleMessageSessionHoldsOnlyWorkersThatAcceptIt) {
                                      "worker=LateWorker reporterID=1"));
 }
 
+TEST_F(WorkerSelection, SingleMessageSessionHoldsNoWorkerWhoseClassSaysNo) {
+  auto row = TarnReportingSessionWorkerClass::of<EarlyWorker>();
+  row.handleSingleMessageSession = [] { return false; };
+  useWorkers({row});
+  EXPECT_EQ(makeSession(1, TarnReportingSession::Mode::SingleMessage)->workerInstanceCount(), 0U);
+  EXPECT_EQ(makeSession()->workerInstanceCount(), 1U);
+}
+
+TEST_F(WorkerSelection, DerivedListsHoldTheClassesInTheOrderOfTheTable) {
+  useWorkers<UnmakeableWorker, PlainWorker, ProducerWorker, BothWorker, EarlyWorker, LateWorker>();
+  const TarnReportingSessionWorkerClasses classes(TarnReportingSession::getAllWorkerClasses());
+  const auto names = [](const TarnReportingSessionWorkerClasses::List& list) {
+    Strings found;
+    for (const auto* row : list) {
+      found.emplace_back(row->name);
+    }
+    return found;
+  };
+  EXPECT_EQ(TarnReportingSession::getAllWorkerClasses().size(), 6U);
+  EXPECT_EQ(names(classes.initializableWorkerClasses),
+            (Strings{"PlainWorker", "ProducerWorker", "BothWorker", "EarlyWorker", "LateWorker"}));
+  EXPECT_EQ(names(classes.consumerWorkerClasses), (Strings{"BothWorker", "EarlyWorker", "LateWorker"}));
+  EXPECT_EQ(names(classes.producerWorkerClasses), (Strings{"ProducerWorker", "BothWorker"}));
+  EXPECT_EQ(names(classes.startOnInitWorkerClasses), (Strings{"EarlyWorker", "LateWorker"}));
+  EXPECT_EQ(platform_.log.entries().at(0).level, LogLevel::Debug);
+  EXPECT_EQ(platform_.log.messages().at(0), "Worker does not implement initWithSession! UnmakeableWorker");
+}
+
+TEST_F(WorkerSelection, WorkersWithoutStartAndStopWriteNoLineAtStartAndOneAtStop) {
+  useWorkers<EarlyWorker>();
+  const auto session = makeSession();
+  session->start();
+  EXPECT_EQ(platform_.log.count("action=start"), 0U);
+  session->stop();
+  EXPECT_EQ(platform_.log.count("TarnReportingSessionWorker action=stop worker=EarlyWorker reporterID=7"), 1U);
+  session->stop();
+  EXPECT_EQ(platform_.log.count("action=stop"), 1U);
+}
+
+TEST_F(WorkerSelection, WorkerThatRefusedToStartIsNotStopped) {
+  useWorkers<RefusingWorker, ConsumerWorker>();
+  script().startsRefusing = true;
+  const auto session = makeSession();
+  session->start();
+  takeTrail();
+  session->stop();
+  EXPECT_EQ(takeTrail(), (Strings{"ConsumerWorker stop"}));
+  EXPECT_EQ(platform_.log.count("action=stop worker=RefusingWorker"), 0U);
+}
+
 TEST_F(WorkerSelection, WorkerWhoseStartFailsStaysIdleAndIsOfferedStartAgain) {
   useWorkers<RefusingWorker>();
   script().startsRefusing = true;
