@@ -4,7 +4,8 @@
 #include <bit>
 #include <cmath>
 #include <cstdint>
-#include <deque>
+#include <string>
+#include <unordered_map>
 #include <utility>
 #include <vector>
 
@@ -60,11 +61,11 @@ bool appendUtf16(std::string& out, std::string_view bytes) {
   return true;
 }
 
-// Reads by recursion, which the bound on nesting bounds. Objects that are named twice are read twice: the bounds on
-// values and content hold for what comes out.
+// Reads by recursion, which the bound on nesting bounds. An object that is named twice is read once and stands in both
+// places; it counts at each, so that the bounds hold for what comes out.
 class BinaryReader {
  public:
-  explicit BinaryReader(std::string_view bytes) : bytes_(bytes) {}
+  explicit BinaryReader(std::string_view bytes) : bytes_(bytes), mostContent_(mostContentOf(bytes.size())) {}
 
   PropertyListReading read() {
     if (!readTrailer() || !readObject(top_)) {
@@ -74,11 +75,27 @@ class BinaryReader {
   }
 
  private:
-  // A container that is being read.
+  // A container that is being read, with the counts as they were at its begin.
   struct Level {
-    std::uint64_t object;
+    std::size_t offset;
     bool isDictionary;
+    std::size_t valuesBefore;
+    std::uint64_t contentBefore;
+    std::size_t height;    // of what was read of it: 1 and that of its highest member
+    std::string_view key;  // of the member that is read, in a dictionary
   };
+  // A container that was read, with what stands in it.
+  struct Finished {
+    Value value;
+    std::size_t values;
+    std::uint64_t content;
+    std::size_t height;
+  };
+
+  static std::uint64_t mostContentOf(std::size_t bytes) {
+    return std::clamp<std::uint64_t>(std::uint64_t{bytes} * kPropertyListContentPerByte,
+                                     kPropertyListContentOfSmallFile, kMaximumPropertyListContent);
+  }
 
   bool fail(std::string text) {
     fault_ = std::move(text);
@@ -143,13 +160,18 @@ class BinaryReader {
   }
   bool spend(std::uint64_t bytes) {
     content_ += bytes;
-    return content_ <= kMaximumPropertyListContent || fail("too large");
+    return content_ <= mostContent_ || fail("too large");
+  }
+  bool countValues(std::size_t values) {
+    values_ += values;
+    return values_ <= kMaximumPropertyListValues || fail("too many values");
   }
 
   bool readObject(std::uint64_t object) {
-    if (++values_ > kMaximumPropertyListValues) return fail("too many values");
     std::uint64_t byte = 0;
-    if (!goTo(object) || !takeNumber(1, byte)) return false;
+    if (!countValues(1) || !goTo(object)) return false;
+    const std::size_t offset = at_;
+    if (!takeNumber(1, byte)) return false;
     const auto mark = static_cast<unsigned>(byte);
     if (mark == kFalse || mark == kTrue) return add(mark == kTrue);
     if (mark == kFloat || mark == kDouble || mark == kDate) return readReal(mark);
@@ -160,14 +182,16 @@ class BinaryReader {
         return readData(mark);
       case kAsciiText:
       case kUtf16Text: {
-        std::string text;
+        std::string_view text;
         return readText(mark, text) && add(text);
       }
       case kUid:
-        return readUid(mark);
       case kArray:
-      case kDictionary:
-        return readContainer(object, mark);
+      case kDictionary: {
+        const auto known = finished_.find(offset);
+        if (known != finished_.end()) return addAgain(known->second);
+        return (mark & 0xF0U) == kUid ? readUid(offset, mark) : readContainer(offset, mark);
+      }
       default:
         return fail("a kind of object that has no place here");
     }
@@ -202,29 +226,38 @@ class BinaryReader {
     return takeCount(mark, count) && take(count, bytes) && spend(count) && add(DataView{bytes});
   }
 
-  bool readText(unsigned mark, std::string& text) {
+  // `text` stays: it lies in the file, or in decoded_.
+  bool readText(unsigned mark, std::string_view& text) {
     const bool isUtf16 = (mark & 0xF0U) == kUtf16Text;
+    const std::size_t place = at_;
     std::uint64_t count = 0;
-    std::string_view bytes;
     if (!takeCount(mark, count)) return false;
     if (count > bytes_.size()) return fail("an object that is cut off");
-    if (!take(isUtf16 ? 2 * count : count, bytes) || !spend(bytes.size())) return false;
-    if (isUtf16) return appendUtf16(text, bytes) || fail("a text that is not UTF-16");
-    text = bytes;
+    if (!take(isUtf16 ? 2 * count : count, text) || !spend(text.size())) return false;
+    if (isUtf16) return decodeUtf16(place, text);
     const auto isAscii = [](char byte) { return static_cast<unsigned char>(byte) < 0x80; };
     return std::all_of(text.begin(), text.end(), isAscii) || fail("a text that is not ASCII");
   }
 
-  bool readUid(unsigned mark) {
+  // Puts in place of a text's units what they mean, which is worked out once for each object.
+  bool decodeUtf16(std::size_t place, std::string_view& text) {
+    const auto [known, isNew] = decoded_.try_emplace(place);
+    if (isNew && !appendUtf16(known->second, text)) return fail("a text that is not UTF-16");
+    text = known->second;
+    return true;
+  }
+
+  bool readUid(std::size_t offset, unsigned mark) {
     const std::uint64_t size = (mark & 0xFU) + 1;
     std::uint64_t value = 0;
     if (size > 8) return fail("a UID beyond 64 bits");
-    return takeNumber(size, value) && add(Dictionary{{"CF$UID", value}});
+    if (!takeNumber(size, value)) return false;
+    return add(finished_.emplace(offset, Finished{Value(Dictionary{{"CF$UID", value}}), 0, 0, 0}).first->second.value);
   }
 
-  bool readContainer(std::uint64_t object, unsigned mark) {
+  bool readContainer(std::size_t offset, unsigned mark) {
     if (levels_.size() == kMaximumPropertyListNesting) return fail("nested too deeply");
-    if (std::any_of(levels_.begin(), levels_.end(), [&](const Level& level) { return level.object == object; })) {
+    if (std::any_of(levels_.begin(), levels_.end(), [&](const Level& level) { return level.offset == offset; })) {
       return fail("an object inside itself");
     }
     const bool isDictionary = (mark & 0xF0U) == kDictionary;
@@ -234,18 +267,37 @@ class BinaryReader {
     if (!takeCount(mark, count)) return false;
     if (count > bytes_.size() / referenceBytes_) return fail("an object that is cut off");
     if ((isDictionary && !take(count * referenceBytes_, keys)) || !take(count * referenceBytes_, values)) return false;
-    const std::size_t keysBegin = keys_.size();
-    levels_.push_back({object, isDictionary});
+    levels_.push_back({offset, isDictionary, values_, content_, 1, {}});
     builder_.begin();
     for (std::size_t at = 0; at < values.size(); at += referenceBytes_) {
       if (isDictionary && !readKey(number(keys.substr(at, referenceBytes_)))) return false;
       if (!readObject(number(values.substr(at, referenceBytes_)))) return false;
     }
+    return finishContainer();
+  }
+
+  bool finishContainer() {
+    const Level level = levels_.back();
     levels_.pop_back();
-    if (!isDictionary) return add(builder_.finishArray());
-    const auto finished = builder_.finishDictionary(cache_);
-    keys_.resize(keysBegin);
-    return finished ? add(*finished) : fail("a key stands twice in a dictionary");
+    Finished made{{}, values_ - level.valuesBefore, content_ - level.contentBefore, level.height};
+    if (level.isDictionary) {
+      const auto finished = builder_.finishDictionary(cache_);
+      if (!finished) return fail("a key stands twice in a dictionary");
+      made.value = *finished;
+    } else {
+      made.value = builder_.finishArray();
+    }
+    return addContainer(finished_.emplace(level.offset, std::move(made)).first->second);
+  }
+
+  // One that stands in another place, too.
+  bool addAgain(const Finished& known) {
+    if (levels_.size() + known.height > kMaximumPropertyListNesting) return fail("nested too deeply");
+    return countValues(known.values) && spend(known.content) && addContainer(known);
+  }
+  bool addContainer(const Finished& made) {
+    if (!levels_.empty()) levels_.back().height = std::max(levels_.back().height, made.height + 1);
+    return add(made.value);
   }
 
   bool readKey(std::uint64_t object) {
@@ -253,15 +305,14 @@ class BinaryReader {
     if (!goTo(object) || !takeNumber(1, byte)) return false;
     const auto mark = static_cast<unsigned>(byte);
     if ((mark & 0xF0U) != kAsciiText && (mark & 0xF0U) != kUtf16Text) return fail("a key that is no text");
-    keys_.emplace_back();
-    return readText(mark, keys_.back());
+    return readText(mark, levels_.back().key);
   }
 
   bool add(const ValueView& value) {
     if (levels_.empty()) {
       value_ = value;
     } else if (levels_.back().isDictionary) {
-      builder_.add(keys_.back(), value);
+      builder_.add(levels_.back().key, value);
     } else {
       builder_.add(value);
     }
@@ -269,6 +320,7 @@ class BinaryReader {
   }
 
   const std::string_view bytes_;
+  const std::uint64_t mostContent_;
   std::size_t at_ = 0;
   std::size_t offsetBytes_ = 0;
   std::size_t referenceBytes_ = 0;
@@ -277,8 +329,9 @@ class BinaryReader {
   std::size_t tableBegin_ = 0;
   KeyListCache cache_;
   PackedBuilder builder_;
-  std::deque<std::string> keys_;  // of every open dictionary; the builder looks at them, so they mustn't move
   std::vector<Level> levels_;
+  std::unordered_map<std::size_t, Finished> finished_;    // by offset
+  std::unordered_map<std::size_t, std::string> decoded_;  // by offset, behind the mark; a node's text doesn't move
   std::size_t values_ = 0;
   std::uint64_t content_ = 0;
   std::string fault_;

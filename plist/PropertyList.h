@@ -1,7 +1,8 @@
 // PropertyList: property-list files, as people and their tools write them, in the XML or the binary format.
 //
 // The bytes are not trusted. Whatever they are, reading ends with a value or with the first fault and its place, and
-// stays within the bounds below: a file that names one object a million times is cut off like one that holds a million.
+// stays within the bounds below: a file that names one object a million times is cut off like one that holds a million,
+// and reading it takes no longer than its bytes are worth, since an object is read once however often it is named.
 // Nothing outside the bytes is ever looked at.
 //
 // Threads: any; everything is stateless. Nothing is thrown.
@@ -21,6 +22,10 @@ constexpr std::size_t kMaximumPropertyListBytes = std::size_t{16} << 20U;
 constexpr std::size_t kMaximumPropertyListValues = std::size_t{1} << 20U;
 // Of all texts, keys and data together, counted at each place where they stand.
 constexpr std::size_t kMaximumPropertyListContent = std::size_t{64} << 20U;
+// A binary file names one text in many places at the price of a reference each. What comes out of one holds at most
+// this much for each byte of the file, or as much as any small file may.
+constexpr std::size_t kPropertyListContentPerByte = 32;
+constexpr std::size_t kPropertyListContentOfSmallFile = std::size_t{4} << 20U;
 
 // What is wrong, and where: a line of XML, counted from 1, or a byte of the binary format, counted from 0.
 struct PropertyListFault {

@@ -221,6 +221,90 @@ TEST(BinaryPropertyList, ALongTextThatIsNamedOftenIsCutOff) {
   EXPECT_EQ(readFile(file).view().array().size(), 8U);
 }
 
+// A long UTF-16 text with its units of letters, and a root that names it as an item, or as a key of many dictionaries.
+std::string longUtf16(std::uint64_t units) {
+  return "\x6F\x12" + bigEndian(units, 4) + std::string(2 * units, 'a');
+}
+std::string arrayOfItemOne(std::uint64_t count) {
+  std::string object = "\xAF\x12" + bigEndian(count, 4);
+  for (std::uint64_t item = 0; item < count; ++item) object += bigEndian(1, 2);
+  return object;
+}
+
+TEST(BinaryPropertyList, ContentIsBoundedByTheBytesOfTheFile) {
+  // 100 KB, whose text a reference of two bytes names again and again: half a second of work when 64 MiB may come out.
+  File file{{arrayOfItemOne(600), longUtf16(50000)}};
+  file.referenceBytes = 2;
+  EXPECT_EQ(faultOf(file), "too large");
+  const std::uint64_t allowed = file.make().size() * kPropertyListContentPerByte / 100000;
+  ASSERT_LT(allowed, kPropertyListContentOfSmallFile / 100000);
+  file.objects[0] = arrayOfItemOne(kPropertyListContentOfSmallFile / 100000);
+  EXPECT_EQ(readFile(file).view().array().size(), kPropertyListContentOfSmallFile / 100000);
+  file.objects[0] = arrayOfItemOne(kPropertyListContentOfSmallFile / 100000 + 1);
+  EXPECT_EQ(faultOf(file), "too large");
+}
+
+TEST(BinaryPropertyList, ALargerFileMayHoldMoreContent) {
+  // 500 KB: 32 times as much is beyond what any small file may hold.
+  File file{{arrayOfItemOne(31), longUtf16(250000)}};
+  file.referenceBytes = 2;
+  EXPECT_EQ(readFile(file).view().array().size(), 31U);
+  file.objects[0] = arrayOfItemOne(33);
+  EXPECT_EQ(faultOf(file), "too large");
+}
+
+TEST(BinaryPropertyList, ContentCountsAtEachPlaceOfASharedContainer) {
+  File file{{arrayOfItemOne(40), bytes({0xD1, 0, 2, 0, 3}), longUtf16(50000), "\x09"}};
+  file.referenceBytes = 2;
+  EXPECT_EQ(readFile(file).view().array().size(), 40U);
+  file.objects[0] = arrayOfItemOne(60);
+  EXPECT_EQ(faultOf(file), "too large");
+}
+
+TEST(BinaryPropertyList, ASharedContainerStandsInEveryPlaceAndIsReadOnce) {
+  File file{{bytes({0xA3, 1, 1, 3}), bytes({0xD1, 2, 3}), "\x51k", bytes({0x80, 5})}};
+  const Dictionary uid{{"CF$UID", 5}};
+  const Dictionary shared{{"k", uid}};
+  const Value value = readFile(file);
+  EXPECT_EQ(value, Value(Array{shared, shared, uid}));
+  const Array items = value.view().array();
+  EXPECT_TRUE(items[0].dictionary().sharesStorageWith(items[1].dictionary()));
+}
+
+TEST(BinaryPropertyList, ValuesCountAtEachPlaceOfASharedContainer) {
+  // 1 + 1023 * (1 + 1024) values are within the bound, one row more is beyond it.
+  File file{{arrayOfItemOne(1023), arrayOfItemOne(1024), "\x09"}};
+  for (std::size_t at = 7; at < file.objects[1].size(); at += 2) file.objects[1][at] = 2;
+  file.referenceBytes = 2;
+  EXPECT_EQ(readFile(file).view().array().size(), 1023U);
+  file.objects[0] = arrayOfItemOne(1024);
+  EXPECT_EQ(faultOf(file), "too many values");
+}
+
+TEST(BinaryPropertyList, NestingIsBoundedWhereAContainerIsNamedAgain) {
+  // Object 1 is 63 levels high, which the root's first item may be; the second item names it a level deeper.
+  const std::size_t high = kMaximumPropertyListNesting - 1;
+  File file{{bytes({0xA2, 1}) + bigEndian(high + 1, 1)}};
+  for (std::size_t level = 1; level < high; ++level) file.objects.push_back("\xA1" + bigEndian(level + 1, 1));
+  file.objects.emplace_back("\xA0");
+  file.objects.push_back(bytes({0xA1, 1}));
+  EXPECT_EQ(faultOf(file), "nested too deeply");
+  file.objects.back() = bytes({0xA1, 2});
+  EXPECT_EQ(readFile(file).view().array().size(), 2U);
+}
+
+TEST(BinaryPropertyList, TextsThatShareTheirUnitsAreTextsOfTheirOwn) {
+  // The count of the first object's text is the mark of the second one's: 0x61 units, and 1.
+  std::string file = "bplist00";
+  file += bytes({0xA2, 1, 2}) + bytes({0x6F, 0x10, 0x61});
+  for (unsigned unit = 0; unit < 0x61; ++unit) file += bytes({0, 'x'});
+  const std::size_t table = file.size();
+  file += bytes({8, 11, 13}) + std::string(6, '\0') + bytes({1, 1}) + bigEndian(3, 8) + bigEndian(0, 8);
+  file += bigEndian(table, 8);
+  const PropertyListReading reading = readBinaryPropertyList(file);
+  EXPECT_EQ(reading.value, Value(Array{std::string(0x61, 'x'), "x"}));
+}
+
 TEST(BinaryPropertyList, AFileBeyondTheBoundIsNotLookedAt) {
   EXPECT_EQ(faultOf("bplist00" + std::string(kMaximumPropertyListBytes, '\0')), "too large");
 }
