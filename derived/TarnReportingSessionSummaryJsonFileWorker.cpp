@@ -9,7 +9,7 @@
 #include "platform/Clock.h"
 #include "platform/Facilities.h"
 #include "platform/LocalCalendar.h"
-#include "plist/Json.h"
+#include "plist/EscapedText.h"
 #include "plist/PrettyJson.h"
 #include "service/TarnReportingLog.h"
 #include "service/TarnReportingPlatform.h"

@@ -16,10 +16,6 @@ namespace tarn::plist {
 
 // Appends the value as compact JSON, members in their own order.
 void appendJson(std::string& out, const ValueView& value);
-// Appends a JSON text with its quotes; control characters, quotes and backslashes escaped, all else as it is.
-void appendJsonText(std::string& out, std::string_view text);
-// Appends a text with its control characters escaped as in JSON and all else as it is.
-void appendEscapedControls(std::string& out, std::string_view text);
 // Appends the base64 form.
 void appendBase64(std::string& out, std::string_view bytes);
 // The bytes of a base64 text (RFC 4648, padded, no line breaks); nothing when it isn't one.

@@ -5,7 +5,7 @@
 
 #include "plist/CalendarDate.h"
 #include "plist/Dictionary.h"
-#include "plist/Json.h"
+#include "plist/EscapedText.h"
 #include "plist/ValueView.h"
 
 namespace tarn::plist {

@@ -9,7 +9,7 @@
 
 #include "platform/linux/JsonValues.h"
 #include "plist/Dictionary.h"
-#include "plist/Json.h"
+#include "plist/EscapedText.h"
 
 namespace tarn::linux_host {
 

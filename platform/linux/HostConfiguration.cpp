@@ -19,7 +19,7 @@
 
 #include "platform/linux/HostLog.h"
 #include "platform/linux/SmallFile.h"
-#include "plist/Json.h"
+#include "plist/EscapedText.h"
 
 namespace tarn::linux_host {
 

@@ -9,6 +9,7 @@
 
 #include "platform/linux/SystemError.h"
 #include "platform/linux/UniqueDescriptor.h"
+#include "plist/EscapedText.h"
 #include "plist/Json.h"
 #include "wire/Utf8.h"
 

@@ -10,6 +10,7 @@
 
 #include "platform/linux/SmallFile.h"
 #include "platform/linux/SystemError.h"
+#include "plist/EscapedText.h"
 #include "plist/Json.h"
 
 namespace tarn::linux_host {

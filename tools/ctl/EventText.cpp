@@ -5,6 +5,7 @@
 #include <cstdio>
 #include <ctime>
 
+#include "plist/EscapedText.h"
 #include "plist/Json.h"
 #include "tools/ctl/Output.h"
 

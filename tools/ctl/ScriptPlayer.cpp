@@ -11,6 +11,7 @@
 #include <variant>
 #include <vector>
 
+#include "plist/EscapedText.h"
 #include "plist/Json.h"
 #include "tools/ctl/ExitStatus.h"
 #include "tools/script/ScriptParser.h"
