@@ -7,8 +7,8 @@
 #include <string_view>
 #include <vector>
 
-#include "bench/Figures.h"
 #include "bench/Measure.h"
+#include "bench/figures/Figures.h"
 
 namespace {
 

@@ -14,8 +14,8 @@
 #include "bench/Message.h"
 #include "platform/Clock.h"
 #include "platform/Log.h"
-#include "platform/recorder/Recorder.h"
-#include "platform/recorder/RecorderTallyService.h"
+#include "recorder/Recorder.h"
+#include "recorder/RecorderTallyService.h"
 
 namespace {
 

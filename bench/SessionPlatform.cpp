@@ -1,8 +1,8 @@
 #include "bench/SessionPlatform.h"
 
 #include "bench/Measure.h"
-#include "service/TarnReportingPlatform.h"
 #include "service/TarnReportingWorkerClasses.h"
+#include "service/vocabulary/TarnReportingPlatform.h"
 #include "session/TarnReportingSession.h"
 
 namespace tarn::bench {

@@ -7,13 +7,13 @@
 
 #include <string>
 
+#include "host/machine/LinuxClock.h"
+#include "host/machine/LinuxFileSystem.h"
+#include "host/traces/LinuxSignposts.h"
 #include "platform/Facilities.h"
 #include "platform/TallyService.h"
 #include "platform/TracePoints.h"
-#include "platform/linux/LinuxClock.h"
-#include "platform/linux/LinuxFileSystem.h"
-#include "platform/linux/LinuxSignposts.h"
-#include "platform/testing/FakePlatform.h"
+#include "testing/FakePlatform.h"
 
 namespace tarn::bench {
 

@@ -10,7 +10,7 @@
 #include <string_view>
 #include <utility>
 
-#include "service/TarnReportingLog.h"
+#include "service/vocabulary/TarnReportingLog.h"
 #include "session/TarnReportingSession.h"
 #include "session/TarnReportingSessionMessage.h"
 

@@ -2,7 +2,7 @@
 
 #include <array>
 
-#include "service/TarnReportingUtility.h"
+#include "service/vocabulary/TarnReportingUtility.h"
 
 namespace tarn {
 

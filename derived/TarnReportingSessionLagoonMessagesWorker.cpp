@@ -5,8 +5,8 @@
 
 #include "derived/TarnReportingDerivation.h"
 #include "derived/TarnReportingSegments.h"
-#include "service/TarnReportingLog.h"
-#include "service/TarnReportingUtility.h"
+#include "service/vocabulary/TarnReportingLog.h"
+#include "service/vocabulary/TarnReportingUtility.h"
 #include "session/TarnReportingSession.h"
 
 namespace tarn {

@@ -9,8 +9,8 @@
 #include "platform/Facilities.h"
 #include "platform/NotificationCenter.h"
 #include "plist/Value.h"
-#include "service/TarnReportingLog.h"
-#include "service/TarnReportingPlatform.h"
+#include "service/vocabulary/TarnReportingLog.h"
+#include "service/vocabulary/TarnReportingPlatform.h"
 
 namespace tarn {
 

@@ -7,7 +7,7 @@
 
 #include "platform/DefaultsStore.h"
 #include "platform/Facilities.h"
-#include "service/TarnReportingPlatform.h"
+#include "service/vocabulary/TarnReportingPlatform.h"
 
 namespace tarn {
 

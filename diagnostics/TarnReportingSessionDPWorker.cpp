@@ -13,9 +13,9 @@
 #include "platform/GyreService.h"
 #include "platform/NotificationCenter.h"
 #include "plist/Value.h"
-#include "service/TarnReportingLog.h"
-#include "service/TarnReportingPlatform.h"
-#include "service/TarnReportingUtility.h"
+#include "service/vocabulary/TarnReportingLog.h"
+#include "service/vocabulary/TarnReportingPlatform.h"
+#include "service/vocabulary/TarnReportingUtility.h"
 #include "session/TarnReportingSessionKeys.h"
 #include "session/TarnReportingSessionMessage.h"
 

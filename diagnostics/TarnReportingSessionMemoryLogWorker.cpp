@@ -12,9 +12,9 @@
 #include "platform/Condition.h"
 #include "platform/Facilities.h"
 #include "platform/WorkQueue.h"
-#include "service/TarnReportingLog.h"
-#include "service/TarnReportingPlatform.h"
-#include "service/TarnReportingUtility.h"
+#include "service/vocabulary/TarnReportingLog.h"
+#include "service/vocabulary/TarnReportingPlatform.h"
+#include "service/vocabulary/TarnReportingUtility.h"
 #include "session/TarnReportingSession.h"
 #include "session/TarnReportingSessionMessage.h"
 

@@ -5,9 +5,9 @@
 
 #include "platform/Facilities.h"
 #include "platform/WattlogService.h"
-#include "service/TarnReportingLog.h"
-#include "service/TarnReportingPlatform.h"
-#include "service/TarnReportingUtility.h"
+#include "service/vocabulary/TarnReportingLog.h"
+#include "service/vocabulary/TarnReportingPlatform.h"
+#include "service/vocabulary/TarnReportingUtility.h"
 #include "session/TarnReportingSession.h"
 #include "session/TarnReportingSessionKeys.h"
 #include "session/TarnReportingSessionMessage.h"

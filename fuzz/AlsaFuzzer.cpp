@@ -4,7 +4,7 @@
 #include <cstdlib>
 #include <string_view>
 
-#include "platform/linux/AlsaText.h"
+#include "host/drivers/AlsaText.h"
 
 namespace {
 

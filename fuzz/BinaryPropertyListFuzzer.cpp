@@ -6,7 +6,7 @@
 #include <cstdlib>
 #include <string_view>
 
-#include "plist/BinaryPropertyList.h"
+#include "plist/formats/BinaryPropertyList.h"
 
 namespace {
 

@@ -7,7 +7,7 @@
 #include <string>
 #include <string_view>
 
-#include "platform/linux/FlumeFile.h"
+#include "host/drivers/FlumeFile.h"
 
 namespace {
 

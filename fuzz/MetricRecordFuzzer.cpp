@@ -4,11 +4,11 @@
 #include <cstdlib>
 #include <string_view>
 
-#include "diagnostics/AudioIssueDetected.h"
-#include "diagnostics/TextFields.h"
-#include "diagnostics/TextLines.h"
-#include "diagnostics/WireReader.h"
-#include "diagnostics/WireWriter.h"
+#include "diagnostics/pylon/AudioIssueDetected.h"
+#include "diagnostics/pylon/TextFields.h"
+#include "diagnostics/pylon/TextLines.h"
+#include "diagnostics/pylon/WireReader.h"
+#include "diagnostics/pylon/WireWriter.h"
 
 namespace {
 

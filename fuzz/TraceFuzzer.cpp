@@ -6,8 +6,8 @@
 #include <cstdlib>
 #include <string_view>
 
-#include "platform/linux/trace_analysis/ChromeTrace.h"
-#include "platform/linux/trace_analysis/Probes.h"
+#include "host/traces/analysis/ChromeTrace.h"
+#include "host/traces/analysis/Probes.h"
 
 namespace {
 

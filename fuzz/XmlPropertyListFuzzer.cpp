@@ -5,8 +5,8 @@
 #include <cstdlib>
 #include <string_view>
 
-#include "plist/XmlPropertyList.h"
-#include "service/DataSerialize.h"
+#include "plist/formats/XmlPropertyList.h"
+#include "service/vocabulary/DataSerialize.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   using namespace tarn;

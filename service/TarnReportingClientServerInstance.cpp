@@ -6,11 +6,11 @@
 #include "platform/ProcessControl.h"
 #include "platform/TracePoints.h"
 #include "platform/WorkQueue.h"
-#include "service/TarnReportingLog.h"
-#include "service/TarnReportingPlatform.h"
 #include "service/TarnReportingServiceDelegateProtocol.h"
-#include "service/TarnReportingSignpost.h"
-#include "service/TarnReportingUtility.h"
+#include "service/vocabulary/TarnReportingLog.h"
+#include "service/vocabulary/TarnReportingPlatform.h"
+#include "service/vocabulary/TarnReportingSignpost.h"
+#include "service/vocabulary/TarnReportingUtility.h"
 #include "session/TarnReportingSession.h"
 
 namespace tarn {

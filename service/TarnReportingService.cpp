@@ -10,9 +10,9 @@
 #include "platform/TallyService.h"
 #include "platform/WorkQueue.h"
 #include "service/TarnReportingClientServerInstance.h"
-#include "service/TarnReportingLog.h"
-#include "service/TarnReportingPlatform.h"
-#include "service/TarnReportingUtility.h"
+#include "service/vocabulary/TarnReportingLog.h"
+#include "service/vocabulary/TarnReportingPlatform.h"
+#include "service/vocabulary/TarnReportingUtility.h"
 #include "session/TarnReportingSession.h"
 
 namespace tarn {

@@ -9,17 +9,17 @@
 #include "derived/TarnReportingSessionSystemMonitorWorker.h"
 #include "derived/TarnReportingSessionVolumeMessagesWorker.h"
 #include "diagnostics/TarnReportingSessionDPWorker.h"
-#include "diagnostics/TarnReportingSessionDriverSnapshotWorker.h"
 #include "diagnostics/TarnReportingSessionMemoryLogWorker.h"
-#include "diagnostics/TarnReportingSessionPylonWorker.h"
-#include "diagnostics/TarnReportingSessionSnareWorker.h"
 #include "diagnostics/TarnReportingSessionTattleWorker.h"
 #include "diagnostics/TarnReportingSessionWattlogWorker.h"
+#include "diagnostics/drivers/TarnReportingSessionDriverSnapshotWorker.h"
+#include "diagnostics/pylon/TarnReportingSessionPylonWorker.h"
+#include "diagnostics/snare/TarnReportingSessionSnareWorker.h"
 #include "session/TarnReportingSessionSummaryWorker.h"
 #include "session/TarnReportingSessionTallyWorker.h"
-#include "telemetry/TarnReportingSessionAudioRegistrationWorker.h"
-#include "telemetry/TarnReportingSessionRtcWorker.h"
-#include "telemetry/TarnReportingSessionTraceWorker.h"
+#include "telemetry/registration/TarnReportingSessionAudioRegistrationWorker.h"
+#include "telemetry/rtc/TarnReportingSessionRtcWorker.h"
+#include "telemetry/trace/TarnReportingSessionTraceWorker.h"
 
 namespace tarn {
 

@@ -16,7 +16,7 @@
 
 #include "platform/TarnReportingServiceProtocol.h"
 #include "plist/Dictionary.h"
-#include "service/TarnReportingVocabulary.h"
+#include "service/vocabulary/TarnReportingVocabulary.h"
 #include "session/TarnReportingSessionMessageLog.h"
 #include "session/TarnReportingSessionPreviousValues.h"
 #include "session/TarnReportingSessionWorkerSet.h"

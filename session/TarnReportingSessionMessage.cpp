@@ -4,7 +4,7 @@
 #include <cmath>
 #include <numeric>
 
-#include "service/TarnReportingLog.h"
+#include "service/vocabulary/TarnReportingLog.h"
 #include "session/TarnReportingSessionKeys.h"
 
 namespace tarn {

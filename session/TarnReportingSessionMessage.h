@@ -15,7 +15,7 @@
 #include <vector>
 
 #include "plist/Dictionary.h"
-#include "service/TarnReportingVocabulary.h"
+#include "service/vocabulary/TarnReportingVocabulary.h"
 
 namespace tarn {
 

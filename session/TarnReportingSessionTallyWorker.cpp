@@ -2,7 +2,7 @@
 
 #include "platform/Facilities.h"
 #include "platform/TallyService.h"
-#include "service/TarnReportingPlatform.h"
+#include "service/vocabulary/TarnReportingPlatform.h"
 #include "session/TarnReportingSession.h"
 
 namespace tarn {

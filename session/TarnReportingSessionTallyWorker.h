@@ -9,7 +9,7 @@
 #include <string_view>
 #include <unordered_map>
 
-#include "service/TarnReportingVocabulary.h"
+#include "service/vocabulary/TarnReportingVocabulary.h"
 #include "session/TarnReportingSessionWorker.h"
 
 namespace tarn {

@@ -1,6 +1,6 @@
 #include "session/TarnReportingSessionWorkerClass.h"
 
-#include "service/TarnReportingLog.h"
+#include "service/vocabulary/TarnReportingLog.h"
 
 namespace tarn {
 

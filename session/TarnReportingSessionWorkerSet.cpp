@@ -3,8 +3,8 @@
 #include <algorithm>
 #include <array>
 
-#include "service/TarnReportingLog.h"
-#include "service/TarnReportingSignpost.h"
+#include "service/vocabulary/TarnReportingLog.h"
+#include "service/vocabulary/TarnReportingSignpost.h"
 #include "session/TarnReportingSession.h"
 #include "session/TarnReportingSessionMessage.h"
 

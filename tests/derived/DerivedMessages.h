@@ -6,10 +6,10 @@
 #include <utility>
 #include <vector>
 
-#include "platform/testing/FakePlatform.h"
 #include "plist/Dictionary.h"
 #include "session/TarnReportingSessionMessage.h"
 #include "session/TarnReportingSessionPreviousValues.h"
+#include "testing/FakePlatform.h"
 
 namespace tarn::testing {
 

@@ -8,7 +8,7 @@
 #include <string>
 #include <vector>
 
-#include "platform/testing/FakePlatform.h"
+#include "testing/FakePlatform.h"
 #include "tests/derived/DerivedMessages.h"
 
 namespace tarn {

@@ -9,7 +9,7 @@
 #include "derived/TarnReportingSessionSystemMonitorWorker.h"
 #include "derived/TarnReportingSessionVolumeMessagesWorker.h"
 #include "derived/TarnReportingSystemMonitor.h"
-#include "service/TarnReportingUtility.h"
+#include "service/vocabulary/TarnReportingUtility.h"
 #include "session/TarnReportingSessionSummaryWorker.h"
 #include "session/TarnReportingSessionTallyWorker.h"
 #include "tests/derived/SummaryJsonFileFixture.h"

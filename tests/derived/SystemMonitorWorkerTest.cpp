@@ -5,7 +5,7 @@
 #include <thread>
 
 #include "derived/TarnReportingSystemMonitor.h"
-#include "service/TarnReportingUtility.h"
+#include "service/vocabulary/TarnReportingUtility.h"
 #include "tests/session/SessionFixture.h"
 
 namespace tarn {

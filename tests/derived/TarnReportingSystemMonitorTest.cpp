@@ -7,8 +7,8 @@
 #include <thread>
 #include <vector>
 
-#include "platform/testing/FakePlatform.h"
-#include "service/TarnReportingUtility.h"
+#include "service/vocabulary/TarnReportingUtility.h"
+#include "testing/FakePlatform.h"
 
 namespace tarn {
 namespace {

@@ -4,8 +4,8 @@
 #include <limits>
 
 #include "derived/TarnReportingSessionVolumeMessagesWorker.h"
-#include "platform/testing/FakePlatform.h"
-#include "service/TarnReportingLog.h"
+#include "service/vocabulary/TarnReportingLog.h"
+#include "testing/FakePlatform.h"
 #include "tests/derived/DerivedMessages.h"
 
 namespace tarn {

@@ -2,8 +2,8 @@
 
 #include <csignal>
 
-#include "platform/recorder/EventReader.h"
-#include "plist/Json.h"
+#include "plist/formats/Json.h"
+#include "recorder/store/EventReader.h"
 
 namespace tarn::e2e {
 

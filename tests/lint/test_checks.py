@@ -56,17 +56,33 @@ class IncludeGraph(unittest.TestCase):
     def test_worker_families_do_not_know_each_other(self):
         self.assertEqual(found(include_graph, {
             "derived/Segment.h": ONCE,
-            "telemetry/Flush.cpp": '\n#include "derived/Segment.h"\n',
-        }), [("telemetry/Flush.cpp", 2)])
+            "telemetry/rtc/Flush.cpp": '\n#include "derived/Segment.h"\n',
+        }), [("telemetry/rtc/Flush.cpp", 2)])
 
-    def test_every_row_of_the_table_keeps_plist_at_the_bottom(self):
-        for pattern, floor in include_graph.FLOORS:
-            if floor == "plist":
+    def test_every_row_looks_only_at_rows_before_it(self):
+        rows = list(include_graph.ROOMS)
+        for number, room in enumerate(rows):
+            with self.subTest(room):
+                self.assertLessEqual(set(include_graph.ROOMS[room]) & set(rows), set(rows[:number]))
+
+    def test_every_row_keeps_plist_at_the_bottom(self):
+        for room in include_graph.ROOMS:
+            if room == "plist":
                 continue
-            path = pattern.replace("*.h", "Other.h").replace("*", "Other.h")
-            with self.subTest(path):
+            with self.subTest(room):
                 self.assertIn(("plist/Value.h", 2), found(include_graph, {
-                    "plist/Value.h": ONCE + f'#include "{path}"\n', path: ONCE}))
+                    "plist/Value.h": ONCE + f'#include "{room}/Other.h"\n', f"{room}/Other.h": ONCE}))
+
+    def test_every_folder_of_the_product_has_a_row_and_every_row_a_folder(self):
+        tree = Tree.at(os.path.join(HERE, "..", ".."))
+        folders = {os.path.dirname(path) for path in tree.cxx()}
+        self.assertEqual([room for room in include_graph.ROOMS if room not in folders], [])
+
+    def test_only_the_entry_point_puts_the_host_and_the_service_together(self):
+        files = {"host/loop/MainLoop.h": ONCE, include_graph.ENTRY: '#include "host/loop/MainLoop.h"\n'}
+        self.assertEqual(found(include_graph, files), [])
+        files["service/TarnReportingService.cpp"] = '#include "host/loop/MainLoop.h"\n'
+        self.assertEqual(found(include_graph, files), [("service/TarnReportingService.cpp", 1)])
 
     def test_only_the_table_of_classes_and_tests_include_a_concrete_worker(self):
         worker = "derived/TarnReportingSessionVolumeWorker"
@@ -85,10 +101,11 @@ class IncludeGraph(unittest.TestCase):
 
     def test_third_party_headers_belong_beside_the_floors(self):
         line = "#include <sqlite3.h>\n"
-        for path in ("plist/Json.cpp", "wire/Encoder.cpp", "client/Socket.cpp", "service/DataSerialize.cpp",
-                     "session/Log.cpp", "diagnostics/Pylon.cpp", "platform/testing/FakeClock.cpp"):
+        for path in ("plist/formats/Json.cpp", "wire/Encoder.cpp", "client/Socket.cpp",
+                     "service/vocabulary/DataSerialize.cpp", "session/Log.cpp", "diagnostics/Pylon.cpp",
+                     "testing/FakeClock.cpp"):
             self.assertEqual(found(include_graph, {path: line}), [(path, 1)])
-        for path in ("platform/linux/HostLog.cpp", "platform/recorder/Database.cpp", "tools/ctl/Events.cpp",
+        for path in ("host/log/HostLog.cpp", "recorder/store/Database.cpp", "tools/ctl/Events.cpp",
                      "tests/e2e/RunTest.cpp", "bench/Peers.cpp", "fuzz/FrameFuzzer.cpp"):
             self.assertEqual(found(include_graph, {path: line}), [])
 
@@ -121,7 +138,7 @@ class IncludeGraph(unittest.TestCase):
     def test_conditional_code_is_reported_on_portable_floors_only(self):
         text = "int a;\n#ifdef __linux__\n#endif\n"
         self.assertEqual(found(include_graph, {"session/Log.cpp": text}), [("session/Log.cpp", 2)])
-        self.assertEqual(found(include_graph, {"platform/linux/Log.cpp": text}), [])
+        self.assertEqual(found(include_graph, {"host/log/Log.cpp": text}), [])
 
     def test_a_header_without_pragma_once_is_reported(self):
         self.assertEqual(found(include_graph, {"plist/Value.h": "int a();\n"}), [("plist/Value.h", 1)])
@@ -177,18 +194,18 @@ class BannedCalls(unittest.TestCase):
         text = "std::this_thread::sleep_for(delay);\n"
         for path in ("tests/e2e/RunTest.cpp", "tests/wire/QueueStressTest.cpp"):
             self.assertEqual(found(banned_calls, {path: text}), [])
-        for path in ("tests/session/SessionTest.cpp", "platform/linux/Loop.cpp", "wire/Encoder.cpp"):
+        for path in ("tests/session/SessionTest.cpp", "host/loop/Loop.cpp", "wire/Encoder.cpp"):
             self.assertEqual(found(banned_calls, {path: text}), [(path, 1)])
 
     def test_adapters_may_ask_the_clock(self):
         text = "auto t = std::chrono::steady_clock::now();\n"
-        for path in ("platform/linux/HostClock.cpp", "platform/recorder/Writer.cpp", "client/Waiter.cpp"):
+        for path in ("host/machine/HostClock.cpp", "recorder/Writer.cpp", "client/Waiter.cpp"):
             self.assertEqual(found(banned_calls, {path: text}), [])
 
     def test_bare_new_is_for_the_packed_values_alone(self):
         text = "auto* p = new Body;\n"
         self.assertEqual(found(banned_calls, {"plist/Packed.cpp": text}), [])
-        self.assertEqual(found(banned_calls, {"platform/linux/Loop.cpp": text}), [("platform/linux/Loop.cpp", 1)])
+        self.assertEqual(found(banned_calls, {"host/loop/Loop.cpp": text}), [("host/loop/Loop.cpp", 1)])
 
 
 class Seeds(unittest.TestCase):
@@ -214,7 +231,7 @@ class Seeds(unittest.TestCase):
                 self.assertEqual(found(seeds, {"tests/wire/ATest.cpp": f"\n{text}\n"}), [])
 
     def test_only_tests_are_looked_at_and_not_where_seeds_come_from(self):
-        for path in ("bench/A.cpp", "platform/linux/A.cpp", seeds.SOURCE):
+        for path in ("bench/A.cpp", "host/loop/A.cpp", seeds.SOURCE):
             self.assertEqual(found(seeds, {path: "std::random_device device;\n"}), [])
 
 
@@ -245,8 +262,8 @@ class Wording(unittest.TestCase):
                 self.assertEqual(found(wording, {"docs/a.md": f"see\n `/{folder}/anna/tarnkit`\n"}), [("docs/a.md", 2)])
 
     def test_tests_may_make_up_users_but_name_no_other_private_path(self):
-        self.assertEqual(found(wording, {"tests/linux/A.cpp": '"/home/u/x"\n"/' + "mnt" + '/u/x"\n'}),
-                         [("tests/linux/A.cpp", 2)])
+        self.assertEqual(found(wording, {"tests/host/A.cpp": '"/home/u/x"\n"/' + "mnt" + '/u/x"\n'}),
+                         [("tests/host/A.cpp", 2)])
 
     def test_paths_of_any_machine_and_relative_ones_are_fine(self):
         text = "/var/lib/tarnreporting /run/tarnreporting /usr/share\n./work/a x/home/b $XDG_STATE_HOME/data/x\n"

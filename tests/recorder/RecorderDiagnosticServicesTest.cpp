@@ -1,7 +1,7 @@
 // The bug-filing prompt and the stack-sampling service as the recorder stands in for them.
-#include "platform/recorder/RecorderGyreService.h"
-#include "platform/recorder/RecorderTattleService.h"
-#include "platform/testing/ManualWorkQueues.h"
+#include "recorder/RecorderGyreService.h"
+#include "recorder/RecorderTattleService.h"
+#include "testing/ManualWorkQueues.h"
 #include "tests/recorder/RecorderFixture.h"
 
 namespace tarn::recorder {

@@ -17,9 +17,9 @@
 #include <thread>
 #include <vector>
 
-#include "platform/recorder/Recorder.h"
-#include "platform/testing/ManualClock.h"
-#include "platform/testing/RecordingLog.h"
+#include "recorder/Recorder.h"
+#include "testing/ManualClock.h"
+#include "testing/RecordingLog.h"
 
 namespace tarn::recorder {
 

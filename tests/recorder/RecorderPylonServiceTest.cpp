@@ -1,4 +1,4 @@
-#include "platform/recorder/RecorderPylonService.h"
+#include "recorder/RecorderPylonService.h"
 
 #include "tests/recorder/RecorderFixture.h"
 

@@ -1,4 +1,4 @@
-#include "platform/recorder/RecorderRtcReportingService.h"
+#include "recorder/RecorderRtcReportingService.h"
 
 #include <future>
 #include <thread>

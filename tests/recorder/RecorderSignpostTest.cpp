@@ -1,5 +1,5 @@
 // A hand-over to a back-end is seen in the traces.
-#include "platform/testing/FakePlatform.h"
+#include "testing/FakePlatform.h"
 #include "tests/recorder/RecorderFixture.h"
 
 namespace tarn::recorder {

@@ -1,4 +1,4 @@
-#include "platform/recorder/RecorderSnareService.h"
+#include "recorder/RecorderSnareService.h"
 
 #include <atomic>
 #include <condition_variable>
@@ -6,7 +6,7 @@
 #include <regex>
 #include <set>
 
-#include "platform/linux/LinuxRandomSource.h"
+#include "host/machine/LinuxRandomSource.h"
 #include "tests/recorder/RecorderFixture.h"
 
 namespace tarn::recorder {

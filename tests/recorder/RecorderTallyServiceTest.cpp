@@ -1,4 +1,4 @@
-#include "platform/recorder/RecorderTallyService.h"
+#include "recorder/RecorderTallyService.h"
 
 #include "tests/recorder/RecorderFixture.h"
 

@@ -1,4 +1,4 @@
-#include "platform/recorder/Recorder.h"
+#include "recorder/Recorder.h"
 
 #include <cmath>
 #include <limits>

@@ -1,4 +1,4 @@
-#include "platform/recorder/RecorderWattlogService.h"
+#include "recorder/RecorderWattlogService.h"
 
 #include "tests/recorder/RecorderFixture.h"
 

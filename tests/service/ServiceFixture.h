@@ -11,15 +11,15 @@
 #include <vector>
 
 #include "derived/TarnReportingSystemMonitor.h"
-#include "diagnostics/TarnReportingDriverUtility.h"
-#include "diagnostics/TarnReportingSnareProcessState.h"
-#include "platform/testing/FakePlatform.h"
+#include "diagnostics/drivers/TarnReportingDriverUtility.h"
+#include "diagnostics/snare/TarnReportingSnareProcessState.h"
 #include "plist/Dictionary.h"
 #include "service/TarnReportingClientServerInstance.h"
-#include "service/TarnReportingLog.h"
 #include "service/TarnReportingService.h"
 #include "service/TarnReportingWorkerClasses.h"
+#include "service/vocabulary/TarnReportingLog.h"
 #include "session/TarnReportingSession.h"
+#include "testing/FakePlatform.h"
 
 namespace tarn::testing {
 

@@ -9,12 +9,12 @@
 #include <utility>
 #include <vector>
 
-#include "platform/testing/FakePlatform.h"
 #include "plist/Dictionary.h"
-#include "service/TarnReportingLog.h"
+#include "service/vocabulary/TarnReportingLog.h"
 #include "session/TarnReportingSession.h"
 #include "session/TarnReportingSessionMessage.h"
 #include "session/TarnReportingSessionWorkerClass.h"
+#include "testing/FakePlatform.h"
 
 namespace tarn::testing {
 

@@ -3,8 +3,8 @@
 #include <CLI/CLI.hpp>
 #include <memory>
 
-#include "platform/linux/JsonDefaultsStore.h"
-#include "platform/linux/JsonValues.h"
+#include "host/settings/JsonDefaultsStore.h"
+#include "host/system/JsonValues.h"
 #include "tools/ctl/Command.h"
 #include "tools/ctl/ExitStatus.h"
 #include "tools/ctl/Output.h"

@@ -6,7 +6,7 @@
 #include <ctime>
 
 #include "plist/EscapedText.h"
-#include "plist/Json.h"
+#include "plist/formats/Json.h"
 #include "tools/ctl/Output.h"
 
 namespace tarn::ctl {

@@ -3,7 +3,7 @@
 
 #include <string>
 
-#include "platform/recorder/EventReader.h"
+#include "recorder/store/EventReader.h"
 
 namespace tarn::ctl {
 

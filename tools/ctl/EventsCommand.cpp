@@ -6,7 +6,7 @@
 #include <csignal>
 #include <memory>
 
-#include "platform/recorder/EventReader.h"
+#include "recorder/store/EventReader.h"
 #include "tools/ctl/Command.h"
 #include "tools/ctl/EventText.h"
 #include "tools/ctl/ExitStatus.h"

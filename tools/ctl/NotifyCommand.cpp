@@ -5,7 +5,7 @@
 #include <optional>
 #include <string>
 
-#include "platform/linux/FileNotificationCenter.h"
+#include "host/settings/FileNotificationCenter.h"
 #include "tools/ctl/Command.h"
 #include "tools/ctl/ExitStatus.h"
 #include "tools/ctl/Output.h"

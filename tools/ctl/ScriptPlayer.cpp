@@ -12,7 +12,7 @@
 #include <vector>
 
 #include "plist/EscapedText.h"
-#include "plist/Json.h"
+#include "plist/formats/Json.h"
 #include "tools/ctl/ExitStatus.h"
 #include "tools/script/ScriptParser.h"
 

@@ -3,7 +3,7 @@
 #include <CLI/CLI.hpp>
 #include <memory>
 
-#include "plist/Json.h"
+#include "plist/formats/Json.h"
 #include "tools/ctl/Command.h"
 #include "tools/ctl/Output.h"
 #include "tools/ctl/ServiceConnection.h"

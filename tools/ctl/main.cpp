@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-#include "platform/linux/HostPaths.h"
+#include "host/settings/HostPaths.h"
 #include "tools/ctl/Command.h"
 #include "tools/ctl/ExitStatus.h"
 #include "tools/ctl/Output.h"

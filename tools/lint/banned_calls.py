@@ -9,13 +9,13 @@ from dataclasses import dataclass
 
 from tree import Finding, code_only, matches
 
-HOST = ("platform/linux/*", "platform/recorder/*", "service/main.cpp", "tools/*", "client/*")
+HOST = ("host/*", "recorder/*", "service/main.cpp", "tools/*", "client/*")
 TRIALS = ("tests/*", "bench/*", "fuzz/*")
 # Where time is the real one: real programs, the real machine's folders, and two adapters that have nothing to wait on.
-REAL_TIME = ("tests/e2e/*", "tests/linux/*", "tests/recorder/*", "tests/client/*", "tests/*Stress*", "bench/*",
-             "tools/*", "platform/linux/FileLock.cpp", "platform/recorder/EventReader.cpp")
+REAL_TIME = ("tests/e2e/*", "tests/scenario/*", "tests/host/*", "tests/recorder/*", "tests/client/*",
+             "tests/*Stress*", "bench/*", "tools/*", "host/system/FileLock.cpp", "recorder/store/EventReader.cpp")
 # A fatal check on our own mistakes, where there is no log yet or no longer.
-LAST_WORDS = ("service/TarnReportingPlatform.cpp", "client/OwnerCheck.cpp", "platform/testing/*")
+LAST_WORDS = ("service/vocabulary/TarnReportingPlatform.cpp", "client/OwnerCheck.cpp", "testing/*")
 NOWHERE = ()
 
 
@@ -56,10 +56,10 @@ BANS = (
     Ban(r"\bstd::random_device\b", HOST + TRIALS, "platform::RandomSource"),
     Ban(call("strerror|strerror_r|perror"), NOWHERE, "std::generic_category().message(code)"),
     Ban(r"\bstd::endl\b", NOWHERE, "'\\n'"),
-    Ban(r"\bstd::(?:cout|cerr|clog|cin)\b", ("service/main.cpp", "tools/*", *TRIALS, "platform/linux/*"),
+    Ban(r"\bstd::(?:cout|cerr|clog|cin)\b", ("service/main.cpp", "tools/*", *TRIALS, "host/*"),
         "the logging helper"),
     Ban(call("printf|fprintf|vprintf|vfprintf|puts|fputs|putchar"),
-        ("service/main.cpp", "tools/*", *TRIALS, "platform/linux/*", *LAST_WORDS), "the logging helper"),
+        ("service/main.cpp", "tools/*", *TRIALS, "host/*", *LAST_WORDS), "the logging helper"),
     Ban(call("sprintf|vsprintf|asprintf|vasprintf"), NOWHERE, "std::to_chars and append, or std::snprintf"),
     Ban(call("strcpy|strcat|strncpy|strtok|gets"), NOWHERE, "std::string, std::string_view"),
     Ban(call("atoi|atol|atoll|atof|strtol|strtoll|strtoul|strtoull|strtod|strtof|sscanf"), NOWHERE, "std::from_chars"),
@@ -68,8 +68,8 @@ BANS = (
     Ban(r"(?<!operator)(?<!operator )(?<!=)(?<!= )\bdelete\b", ("plist/*", "platform/UniqueFunction.h"),
         "a type that owns"),
     Ban(call("malloc|calloc|realloc|free"), ("plist/*", "bench/*"), "a container"),
-    Ban(r"\bstd::(?:thread|async|jthread)\b(?!::id)", (*HOST, *TRIALS, "platform/testing/*"), "platform::WorkQueues"),
-    Ban(call("exit|_exit|quick_exit|_Exit"), ("service/main.cpp", "tools/*", "platform/linux/*", *TRIALS),
+    Ban(r"\bstd::(?:thread|async|jthread)\b(?!::id)", (*HOST, *TRIALS, "testing/*"), "platform::WorkQueues"),
+    Ban(call("exit|_exit|quick_exit|_Exit"), ("service/main.cpp", "tools/*", "host/*", *TRIALS),
         "platform::ProcessControl"),
     Ban(call("system|popen"), NOWHERE, "platform::CommandRunner"),
     Ban(r"\bGTEST_SKIP\b|\bDISABLED_\w+", NOWHERE, "a test that runs, or none"),

@@ -1,72 +1,67 @@
-"""Who may include whom. The folders are floors: a file looks at its own floor and at those below, never up.
+"""Who may include whom. The folders are floors: a file looks at its own folder and at those below, never up.
 
-The tables here are the rule; the code only reads them. A new folder or file that fits no row is a finding by itself.
+The table here is the rule; the code only reads it. A new folder that no row knows is a finding by itself.
 """
 
-import fnmatch
+import os
 import re
 
 from tree import Finding, code_only
 
-# The first row whose pattern fits names a file's floor.
-FLOORS = (
-    ("plist/*", "plist"),
-    ("wire/*", "wire"),
-    ("client/*", "client"),
-    ("platform/linux/*", "linux"),
-    ("platform/recorder/*", "recorder"),
-    ("platform/testing/*", "fakes"),
-    ("platform/*.h", "platform"),
-    ("service/main.cpp", "entry"),
-    ("service/TarnReportingWorkerClasses.cpp", "classes"),
-    ("service/TarnReportingService*", "front"),
-    ("service/TarnReportingClient*", "front"),
-    ("service/TarnReportingSession*", "front"),
-    ("service/TarnReportingWorkerClasses.h", "front"),
-    ("service/*", "vocabulary"),
-    ("session/*", "session"),
-    ("derived/*", "derived"),
-    ("diagnostics/*", "diagnostics"),
-    ("telemetry/*", "telemetry"),
-    ("tools/*", "tools"),
-    ("tests/*", "tests"),
-    ("bench/*", "tests"),
-    ("fuzz/*", "tests"),
-)
+VALUES = ("plist", "plist/formats")
+BASE = VALUES + ("platform",)
+SESSION = BASE + ("service/vocabulary", "session")
+DIAGNOSTICS = ("diagnostics", "diagnostics/pylon", "diagnostics/snare", "diagnostics/drivers")
+TELEMETRY = ("telemetry/rtc", "telemetry/registration", "telemetry/trace")
+WORKERS = ("derived",) + DIAGNOSTICS + TELEMETRY
+# The host's rooms stand on these two.
+GROUND = BASE + ("host/system", "host/log")
+HOST = ("host/system", "host/log", "host/loop", "host/socket", "host/settings", "host/machine", "host/drivers",
+        "host/traces", "host/traces/analysis", "host")
+PROGRAM = SESSION + WORKERS + ("service", "wire", "recorder", "recorder/store") + HOST
 
-BASE = {"plist", "platform"}
-SESSION = BASE | {"vocabulary", "session"}
-FRONT = SESSION | {"front", "derived", "diagnostics", "telemetry"}
-PROGRAM = FRONT | {"wire", "linux", "recorder"}
-
-# What each floor may include. The worker families don't know each other: they meet through the session.
-ALLOWED = {
-    "plist": {"plist"},
-    "wire": {"plist", "wire"},
-    "client": {"plist", "wire", "client"},
-    "platform": BASE,
-    "vocabulary": BASE | {"vocabulary"},
-    "session": SESSION,
-    "derived": SESSION | {"derived"},
-    "diagnostics": SESSION | {"diagnostics"},
-    "telemetry": SESSION | {"telemetry"},
-    "front": FRONT,
-    "classes": FRONT,
-    "linux": BASE | {"wire", "vocabulary", "linux"},
-    "recorder": BASE | {"vocabulary", "linux", "recorder"},
-    "fakes": BASE | {"vocabulary", "fakes"},
-    "entry": PROGRAM,
-    "tools": PROGRAM | {"client", "tools"},
-    "tests": PROGRAM | {"client", "tools", "fakes", "tests"},
+# Each folder, from the ground up, and what its files may include beside files of its own. The worker families don't
+# know each other: they meet through the session.
+ROOMS = {
+    "plist": (),
+    "plist/formats": ("plist",),
+    "wire": ("plist",),
+    "client": ("plist", "wire"),
+    "platform": VALUES,
+    "service/vocabulary": BASE,
+    "session": BASE + ("service/vocabulary",),
+    **{folder: SESSION for folder in WORKERS},
+    "service": SESSION + WORKERS,
+    "host/system": BASE,
+    "host/log": BASE + ("host/system",),
+    "host/loop": GROUND,
+    "host/socket": GROUND + ("host/loop", "wire"),
+    "host/settings": GROUND,
+    "host/machine": GROUND + ("wire",),
+    "host/drivers": GROUND,
+    "host/traces/analysis": (),
+    "host/traces": GROUND + ("host/traces/analysis", "wire"),
+    "recorder/store": BASE,
+    "recorder": BASE + ("service/vocabulary", "recorder/store"),
+    "testing/backends": BASE,
+    "testing": BASE + ("service/vocabulary", "testing/backends"),
+    "tools/script": PROGRAM,
+    "tools/mutate": (),
+    "tools/ctl": PROGRAM + ("client", "tools/script"),
+    # What checks the service shares no code with it, but for the client and the reader of the recorder's file.
+    "tests/scenario": VALUES + ("client", "wire", "recorder/store"),
 }
+# Folders, with all below them, whose files may look at everything.
+TRIALS = ("tests", "bench", "fuzz")
+# The entry point owns no behaviour: it puts together what the folders hold.
+ENTRY = "service/main.cpp"
 
-# Floors that stand on the standard library alone, so that they move to another platform as they are.
-PORTABLE = {"plist", "wire", "client", "platform", "vocabulary", "session", "derived", "diagnostics", "telemetry",
-            "front", "classes", "fakes"}
+# Rooms that stand on the standard library alone, so that they move to another platform as they are.
+PORTABLE = set(SESSION + WORKERS) | {"service", "wire", "client", "testing", "testing/backends"}
 
 # A concrete worker is known to its own source, to the table of classes and to tests; everyone else meets an interface.
 CONCRETE_WORKER = re.compile(r"/TarnReportingSession[A-Za-z]+Worker\.h$")
-KNOWS_WORKERS = {"classes", "tests"}
+CLASS_TABLE = "service/TarnReportingWorkerClasses.cpp"
 
 # The client library stands on sockets, beside the standard library.
 POSIX_SOCKETS = set("fcntl.h poll.h sys/socket.h sys/stat.h sys/types.h sys/uio.h sys/un.h unistd.h".split())
@@ -85,11 +80,16 @@ INCLUDE = re.compile(r'^[ \t]*#[ \t]*include[ \t]*(?:"([^"\n]+)"|<([^>\n]+)>)', 
 CONDITIONAL = re.compile(r"^[ \t]*#[ \t]*(?:if|ifdef|ifndef|elif)\b", re.MULTILINE)
 
 
-def floor_of(path):
-    for pattern, floor in FLOORS:
-        if fnmatch.fnmatchcase(path, pattern):
-            return floor
-    return None
+def room_of(path):
+    """The folder whose rule holds for a file; None for a file in a folder without one."""
+    folder = os.path.dirname(path)
+    if folder in ROOMS:
+        return folder
+    return next((trial for trial in TRIALS if folder == trial or folder.startswith(trial + "/")), None)
+
+
+def may_include(path, room, wanted):
+    return wanted == room or room in TRIALS or wanted in (PROGRAM if path == ENTRY else ROOMS[room])
 
 
 def includes(text):
@@ -104,39 +104,43 @@ def check(tree):
     files = tree.cxx()
     findings = []
     for path, text in files.items():
-        floor = floor_of(path)
-        if floor is None:
-            findings.append(Finding(path, 1, "no row of tools/lint/include_graph.py places this file on a floor"))
+        room = room_of(path)
+        if room is None:
+            findings.append(Finding(path, 1, "no row of tools/lint/include_graph.py knows this folder"))
             continue
         if path.endswith(".h") and "#pragma once" not in text:
             findings.append(Finding(path, 1, "a header wants #pragma once"))
-        if floor in PORTABLE:
+        if is_portable(path, room):
             for match in CONDITIONAL.finditer(code_only(text)):
                 line = text.count("\n", 0, match.start()) + 1
                 findings.append(Finding(path, line, "no conditional code here: what differs by platform is a facility"))
         for line, target, quoted in includes(text):
-            fault = quoted_fault(path, floor, target, files) if quoted else system_fault(floor, target)
+            fault = quoted_fault(path, room, target, files) if quoted else system_fault(path, room, target)
             if fault:
                 findings.append(Finding(path, line, fault))
     return sorted(findings + circles(files))
 
 
-def quoted_fault(path, floor, target, files):
+def is_portable(path, room):
+    return room in PORTABLE and path != ENTRY
+
+
+def quoted_fault(path, room, target, files):
     if target not in files:
         return f'"{target}" is no file of this tree, as seen from its root'
-    wanted = floor_of(target)
-    if wanted not in ALLOWED[floor]:
-        return f"{floor} may not include {wanted} ({target})"
+    wanted = room_of(target)
+    if not may_include(path, room, wanted):
+        return f"{room} may not include {wanted} ({target})"
     own = target.removesuffix(".h") == path.removesuffix(".cpp")
-    if CONCRETE_WORKER.search("/" + target) and not own and floor not in KNOWS_WORKERS:
+    if CONCRETE_WORKER.search("/" + target) and not own and path != CLASS_TABLE and room not in TRIALS:
         return f"{target} is a concrete worker: only the table of classes knows it"
     return None
 
 
-def system_fault(floor, target):
-    if floor not in PORTABLE or target in STANDARD or (floor == "client" and target in POSIX_SOCKETS):
+def system_fault(path, room, target):
+    if not is_portable(path, room) or target in STANDARD or (room == "client" and target in POSIX_SOCKETS):
         return None
-    return f"{floor} stands on the standard library alone, and <{target}> is none of it"
+    return f"{room} stands on the standard library alone, and <{target}> is none of it"
 
 
 def circles(files):

@@ -13,7 +13,7 @@ NARROW = SCRIPTS + (".md", ".cmake", ".txt")
 
 
 def limit_of(path):
-    if path.startswith(("tests/", "platform/testing/", "fuzz/", "bench/")) and path.endswith(CXX):
+    if path.startswith(("tests/", "testing/", "fuzz/", "bench/")) and path.endswith(CXX):
         return TEST_LINES
     if path.endswith(".h"):
         return HEADER_LINES

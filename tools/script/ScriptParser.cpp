@@ -9,7 +9,7 @@
 #include <utility>
 #include <vector>
 
-#include "platform/linux/JsonValues.h"
+#include "host/system/JsonValues.h"
 #include "tools/script/VocabularyNames.h"
 
 namespace tarn::script {

@@ -1,6 +1,6 @@
 #include "tools/script/VocabularyNames.h"
 
-#include "service/TarnReportingVocabulary.h"
+#include "service/vocabulary/TarnReportingVocabulary.h"
 
 namespace tarn::script {
 

@@ -1,0 +1,35 @@
+// TextLines: a text rendering for people, in the text format that the Protocol Buffers tools read and print:
+//
+//   AudioIssueDetected {
+//     duration: 2
+//     issuetype: "glitch"
+//   }
+//
+// Strings stand in quotes; quotes, backslashes and whatever isn't a printable ASCII character are escaped.
+#pragma once
+
+#include <cstddef>
+#include <string>
+
+#include "diagnostics/pylon/TextFormatter.h"
+
+namespace pylonmetrics {
+
+class TextLines final : public TextFormatter {
+ public:
+  void beginObject(std::string_view name) override;
+  void formatSigned(std::string_view name, std::int64_t value) override;
+  void formatUnsigned(std::string_view name, std::uint64_t value) override;
+  void formatString(std::string_view name, std::string_view bytes) override;
+  void endObject() override;
+
+  const std::string& text() const noexcept { return text_; }
+
+ private:
+  void beginLine(std::string_view name);
+
+  std::string text_;
+  std::size_t depth_ = 0;
+};
+
+}  // namespace pylonmetrics

@@ -1,0 +1,57 @@
+// TarnReportingSessionSnareWorker: watches a session's messages for known audio faults and, once one has been seen
+// often enough, has the device's bug-capture service capture diagnostics. On internal builds only.
+//
+// The faults are the business of its instances; the worker feeds them every message, redundant ones included, counts
+// what interests them and keeps the trigger rule. In sessions of the service type Test it counts, but never fires.
+//
+// A message that interests nobody, which is nearly every one, costs a few comparisons of numbers: it is neither
+// compared with an earlier one nor copied.
+#pragma once
+
+#include <memory>
+#include <string_view>
+#include <vector>
+
+#include "diagnostics/snare/TarnReportingSnareOperations.h"
+#include "diagnostics/snare/TarnReportingSnareWorkerInstance.h"
+#include "session/TarnReportingSessionWorker.h"
+
+namespace tarn {
+
+class TarnReportingSessionSnareWorker : public TarnReportingSessionWorkerProtocol,
+                                        public TarnReportingSessionWorkerConsumerProtocol,
+                                        public TarnReportingSnareOperations {
+ public:
+  static constexpr std::string_view kClassName = "TarnReportingSessionSnareWorker";
+  using InstanceClass = TarnReportingSnareWorkerInstanceClass;
+
+  struct Member {
+    InstanceClass instanceClass;
+    std::unique_ptr<TarnReportingSnareWorkerInstance> instance;
+  };
+
+  // For every session of an internal build whose device has the capture service; with the instances that apply.
+  static std::unique_ptr<TarnReportingSessionSnareWorker> initWithSession(
+      const std::shared_ptr<TarnReportingSession>& session);
+  static bool handleSingleMessageSession() { return true; }
+  // Without instances.
+  using TarnReportingSessionWorkerProtocol::TarnReportingSessionWorkerProtocol;
+
+  // Adds an instance of the class behind the others, unless the class or this session declines.
+  void addInstance(const InstanceClass& instanceClass);
+  // In the order in which they were added.
+  const std::vector<Member>& instances() const noexcept { return instances_; }
+
+  bool start();
+  bool handleRedundantMessages() { return true; }
+  void handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) override;
+  void stop();
+
+ private:
+  void handleInterest(const Member& member, const TarnReportingSessionMessage& message);
+  void fire(const Member& member, const TarnReportingSession& session, const TarnReportingSessionMessage& message);
+
+  std::vector<Member> instances_;
+};
+
+}  // namespace tarn

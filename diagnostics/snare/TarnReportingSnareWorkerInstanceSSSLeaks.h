@@ -1,0 +1,35 @@
+// TarnReportingSnareWorkerInstanceSSSLeaks: a system sound that got stuck in the system sound server. Every report that
+// is no repeat makes the device take a snapshot of the logs of the session's processes, but at most one in 15 seconds,
+// whichever sessions the reports come from.
+#pragma once
+
+#include <memory>
+#include <string_view>
+
+#include "diagnostics/snare/TarnReportingSnareProcessState.h"
+#include "diagnostics/snare/TarnReportingSnareWorkerInstance.h"
+
+namespace tarn {
+
+class TarnReportingSnareWorkerInstanceSSSLeaks : public TarnReportingSnareWorkerInstance {
+ public:
+  static constexpr std::string_view kClassName = "TarnReportingSnareWorkerInstanceSSSLeaks";
+
+  // For every session; all share one state.
+  static std::unique_ptr<TarnReportingSnareWorkerInstanceSSSLeaks> initWithSession(
+      const std::shared_ptr<TarnReportingSession>& session);
+  static bool handleSingleMessageSession() { return true; }
+  TarnReportingSnareWorkerInstanceSSSLeaks(std::weak_ptr<TarnReportingSession> session,
+                                           std::shared_ptr<WorkerInstanceState> workerState,
+                                           std::shared_ptr<TarnReportingSnareProcessState> processState);
+
+  bool interestedInMessage(const TarnReportingSessionMessage& message) const override;
+  void fire(const TarnReportingSessionMessage& message);
+
+ private:
+  void requestSnapshot(const TarnReportingSession& session, const TarnReportingSessionMessage& message);
+
+  const std::shared_ptr<TarnReportingSnareProcessState> processState_;
+};
+
+}  // namespace tarn

@@ -1,0 +1,87 @@
+// AlsaFlume: what the machine's own sound hardware counts, as driver report channels. It reads the kernel's texts under
+// one folder, /proc/asound on a real device (see AlsaText), and nothing else; no sound device is opened.
+//
+// A sound card is a driver, under its id. Each PCM substream has three channels, in the sub-group "pcm0p" (device and
+// direction) of one of three groups:
+//
+//   "Speaker"   playback
+//   "Rx"        playback over a digital link (HDMI, DisplayPort, S/PDIF): someone else's speakers receive it
+//   "Tx"        capture
+//
+//   "... State"     the time in each of its states while it is open, in ms; duty cycles since the first reading
+//   "... Frames"    frames that its hardware pointer passed
+//   "... Overruns"  over- and underruns
+//
+// The kernel tells the state of now, so everything is summed up here from reading to reading, and is as fine as these
+// are. A state that is new holds since the trigger time that the kernel tells, and the state before until then; what
+// came and went between two readings is not seen. A pointer or counter that fell began anew. Of a kernel without a
+// counter of overruns, each reading that finds the substream newly in the state XRUN counts as one.
+//
+// A substream that can't be read is one complaint in the log until it changes, and is left out. A machine without sound
+// hardware has no channels and nothing to complain about. What is beyond the bounds is left out and told once.
+//
+// Owner: the entry point; log and clock outlive it. Threads: the server queue.
+#pragma once
+
+#include <array>
+#include <chrono>
+#include <cstdint>
+#include <map>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "host/drivers/AlsaText.h"
+#include "host/drivers/FlumeSource.h"
+#include "platform/Clock.h"
+#include "platform/Log.h"
+
+namespace tarn::linux_host {
+
+class AlsaFlume final : public FlumeSource {
+ public:
+  static constexpr std::size_t kMostCards = 32;  // as many as the kernel has
+  static constexpr std::size_t kMostSubstreams = 256;
+
+  AlsaFlume(std::string folder, platform::Log& log, const platform::Clock& clock);
+  AlsaFlume(const AlsaFlume&) = delete;
+  AlsaFlume& operator=(const AlsaFlume&) = delete;
+
+  platform::FlumeSamples read() override;
+
+ private:
+  // What was summed up of a substream.
+  struct Sums {
+    std::chrono::nanoseconds lastReading{};
+    AlsaStatus last;
+    std::array<std::chrono::nanoseconds, kAlsaStateCount> residencies{};
+    std::array<std::uint64_t, kAlsaStateCount> transitions{};
+    std::uint64_t frames = 0;
+    std::uint64_t overruns = 0;
+  };
+  struct Substream {
+    std::string card;  // "card0"
+    std::string pcm;   // "pcm0p"
+    std::string sub;   // "sub0"
+    std::string path() const { return card + "/" + pcm + "/" + sub; }
+  };
+  using SumsByPath = std::map<std::string, Sums>;
+
+  std::vector<Substream> substreams();
+  std::string cardName(const std::string& card) const;
+  // Adds the substream's channels; what is wrong, empty when nothing is.
+  std::string read(const Substream& substream, SumsByPath& sums, platform::FlumeSamples& samples) const;
+  static void addChannels(const platform::FlumeChannelName& substream, const Sums& sums,
+                          platform::FlumeSamples& samples);
+  static Sums begun(const AlsaStatus& status, std::chrono::nanoseconds now);
+  static void goOn(Sums& sums, const AlsaStatus& status, std::chrono::nanoseconds now);
+
+  const std::string folder_;
+  platform::Log& log_;
+  const platform::Clock& clock_;
+  SumsByPath sums_;                                // of the substreams of the last reading
+  std::map<std::string, std::string> complaints_;  // likewise, by path
+  bool toldBounds_ = false;
+};
+
+}  // namespace tarn::linux_host

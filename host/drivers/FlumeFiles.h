@@ -1,0 +1,68 @@
+// FlumeFiles: driver report channels in files, one driver each: the plain files "*.json" of a folder (see FlumeFile).
+//
+// Every reading looks at the folder and the files anew, in the order of their names, so drivers may write, replace and
+// remove them at any time. A file that can't be read or is broken is one complaint in the log, and the others count.
+// A complaint is logged when it is new, not with every reading: sessions come and go by the thousand. What becomes a
+// complaint: a file that is no plain one, too large, half-written or wrong (whole or one of its channels), a file that
+// held channels and is gone, a channel that an earlier file has too, and what is beyond the bounds. A folder that isn't
+// there holds no files and is nothing to complain about.
+//
+// Pipes, devices and sockets are never opened. Nothing is written.
+//
+// Owner: the entry point; the log outlives it. Threads: the server queue.
+#pragma once
+
+#include <cstddef>
+#include <deque>
+#include <map>
+#include <set>
+#include <string>
+
+#include "host/drivers/FlumeChannelIndex.h"
+#include "host/drivers/FlumeFile.h"
+#include "host/drivers/FlumeSource.h"
+#include "platform/Log.h"
+
+namespace tarn::linux_host {
+
+// A reading holds the server queue up, so it stays small.
+struct FlumeFilesBounds {
+  std::size_t files = 128;                          // those with the first names count
+  std::size_t fileBytes = std::size_t{256} << 10U;  // a larger file holds no channels
+  std::size_t bytes = std::size_t{4} << 20U;        // of all files; those beyond hold no channels
+  std::size_t channels = 4096;                      // of all files; those beyond hold no channels
+  FlumeFileBounds file;
+};
+
+class FlumeFiles final : public FlumeSource {
+ public:
+  FlumeFiles(std::string folder, platform::Log& log, const FlumeFilesBounds& bounds = {});
+  FlumeFiles(const FlumeFiles&) = delete;
+  FlumeFiles& operator=(const FlumeFiles&) = delete;
+
+  platform::FlumeSamples read() override;
+
+ private:
+  // By the file's name, those of files that held channels or a complaint at the last reading; the empty name is the
+  // folder.
+  using Complaints = std::map<std::string, std::string>;
+
+  // What one reading has gathered. The names lie in the channels, which don't move.
+  struct Gathered {
+    std::deque<platform::FlumeChannel> channels;
+    std::set<const platform::FlumeChannelName*, FlumeNameOrder> names;
+    std::size_t bytes = 0;
+  };
+
+  std::string readFile(const std::string& name, Gathered& gathered) const;
+  std::string takeChannels(FlumeFileReading reading, Gathered& gathered) const;
+  void tell(const Complaints& now) const;
+  void complain(const std::string& name, const std::string& complaint) const;
+
+  const std::string folder_;
+  platform::Log& log_;
+  const FlumeFilesBounds bounds_;
+  Complaints last_;
+};
+
+}  // namespace tarn::linux_host

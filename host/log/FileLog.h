@@ -1,0 +1,31 @@
+// FileLog: a log file that others may rotate away: when the file of this name has been renamed or removed, the next
+// line begins a new one. Lines are appended, so that several processes may share the file. Threads: any.
+#pragma once
+
+#include <sys/types.h>
+
+#include <string>
+
+#include "host/log/LineLog.h"
+#include "host/system/UniqueDescriptor.h"
+
+namespace tarn::linux_host {
+
+class FileLog final : public LineLog {
+ public:
+  FileLog(std::string path, const platform::Clock& clock, platform::LogLevel threshold);
+
+  // Opens the file, made with mode 0640 when it isn't there; 0 or an errno value. Called before the sink is used, to
+  // learn early whether it can be.
+  int open();
+
+ private:
+  int descriptor() override;
+
+  const std::string path_;
+  UniqueDescriptor file_;  // guarded by the sink's lock, as are all below
+  dev_t device_ = 0;
+  ino_t inode_ = 0;
+};
+
+}  // namespace tarn::linux_host

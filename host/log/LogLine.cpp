@@ -1,0 +1,58 @@
+#include "host/log/LogLine.h"
+
+#include <array>
+#include <cmath>
+#include <cstdint>
+#include <cstdio>
+#include <ctime>
+
+namespace tarn::linux_host {
+
+namespace {
+
+constexpr std::array<std::string_view, 4> kLevelNames{"debug", "info", "default", "error"};
+constexpr std::int64_t kMicrosecondsPerSecond = 1'000'000;
+
+}  // namespace
+
+std::string_view logLevelName(platform::LogLevel level) noexcept {
+  return kLevelNames[static_cast<std::size_t>(level)];
+}
+
+std::optional<platform::LogLevel> logLevelFromName(std::string_view name) noexcept {
+  for (std::size_t index = 0; index < kLevelNames.size(); ++index) {
+    if (kLevelNames[index] == name) {
+      return static_cast<platform::LogLevel>(index);
+    }
+  }
+  return std::nullopt;
+}
+
+std::string logTime(double epochSeconds) {
+  // Rounded before it is split, so that 0.9999999 becomes the next second and not a million microseconds.
+  const auto microseconds = static_cast<std::int64_t>(std::floor(epochSeconds * 1e6 + 0.5));
+  std::int64_t fraction = microseconds % kMicrosecondsPerSecond;
+  fraction += fraction < 0 ? kMicrosecondsPerSecond : 0;
+  const std::time_t seconds = (microseconds - fraction) / kMicrosecondsPerSecond;
+  std::tm calendar{};
+  ::gmtime_r(&seconds, &calendar);
+  std::array<char, 48> text{};
+  const std::size_t length = std::strftime(text.data(), text.size(), "%Y-%m-%dT%H:%M:%S", &calendar);
+  std::snprintf(text.data() + length, text.size() - length, ".%06lldZ", static_cast<long long>(fraction));
+  return text.data();
+}
+
+std::string logLine(double epochSeconds, const platform::LogEntry& entry) {
+  std::string line = logTime(epochSeconds);
+  line.reserve(line.size() + entry.category.code.size() + entry.text.size() + 12);
+  line += ' ';
+  line += logLevelName(entry.level);
+  line += ' ';
+  line += entry.category.code;
+  line += ' ';
+  line += entry.text;
+  line += '\n';
+  return line;
+}
+
+}  // namespace tarn::linux_host

@@ -1,0 +1,32 @@
+#include "host/log/LogTarget.h"
+
+#include <unistd.h>
+
+#include <optional>
+#include <utility>
+
+#include "host/log/FileLog.h"
+#include "host/log/HostLog.h"
+#include "host/log/JournalLog.h"
+
+namespace tarn::linux_host {
+
+OpenedLog openLog(std::string_view target, platform::LogLevel threshold, const platform::Clock& clock) {
+  if (target == "stderr") {
+    return {std::make_unique<StreamLog>(STDERR_FILENO, clock, threshold), {}};
+  }
+  if (target == "journal") {
+    if (const std::optional<std::string> reason = JournalLog::unavailable()) {
+      return {nullptr, "no journal on this machine: " + *reason};
+    }
+    return {std::make_unique<JournalLog>(threshold), {}};
+  }
+  const std::string path(target);
+  auto file = std::make_unique<FileLog>(path, clock, threshold);
+  if (const int error = file->open(); error != 0) {
+    return {nullptr, "cannot open log file " + path + errorSuffix(error)};
+  }
+  return {std::move(file), {}};
+}
+
+}  // namespace tarn::linux_host

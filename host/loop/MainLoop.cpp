@@ -1,0 +1,128 @@
+#include "host/loop/MainLoop.h"
+
+#include <sys/epoll.h>
+
+#include <array>
+#include <cerrno>
+
+#include "host/log/HostLog.h"
+
+namespace tarn::linux_host {
+
+namespace {
+
+// Pieces of work that run before the sockets are looked at again.
+constexpr std::size_t kPiecesPerTurn = 1024;
+constexpr int kEventsPerTurn = 128;
+
+std::uint64_t tokenOf(int descriptor, std::uint32_t generation) {
+  return (std::uint64_t{generation} << 32) | static_cast<std::uint32_t>(descriptor);
+}
+
+// In whole milliseconds, rounded up so that nothing comes early; -1 stands for ever.
+int milliseconds(std::optional<std::chrono::nanoseconds> timeout) {
+  constexpr std::chrono::nanoseconds kLongest = std::chrono::hours(1);
+  if (!timeout) {
+    return -1;
+  }
+  return static_cast<int>(std::chrono::ceil<std::chrono::milliseconds>(std::min(*timeout, kLongest)).count());
+}
+
+}  // namespace
+
+MainLoop::MainLoop(const platform::Clock& clock)
+    : clock_(clock), queue_(std::make_shared<ServerQueue>(clock, progress_)), epoll_(::epoll_create1(EPOLL_CLOEXEC)) {
+  epoll_event event{};
+  event.events = EPOLLIN;
+  event.data.u64 = tokenOf(queue_->wakeDescriptor(), 0);
+  if (!epoll_ || ::epoll_ctl(epoll_.get(), EPOLL_CTL_ADD, queue_->wakeDescriptor(), &event) != 0) {
+    startError_ = "can't set up the main loop" + errorSuffix(errno);
+  }
+}
+
+MainLoop::~MainLoop() = default;
+
+bool MainLoop::watch(int descriptor, std::uint32_t events, std::shared_ptr<EventHandler> handler) {
+  const auto index = static_cast<std::size_t>(descriptor);
+  if (index >= slots_.size()) {
+    slots_.resize(index + 1);
+  }
+  Slot& slot = slots_[index];
+  epoll_event event{};
+  event.events = events;
+  event.data.u64 = tokenOf(descriptor, ++slot.generation);
+  if (::epoll_ctl(epoll_.get(), EPOLL_CTL_ADD, descriptor, &event) != 0) {
+    return false;
+  }
+  slot.handler = std::move(handler);
+  return true;
+}
+
+void MainLoop::change(int descriptor, std::uint32_t events) {
+  epoll_event event{};
+  event.events = events;
+  event.data.u64 = tokenOf(descriptor, slots_[static_cast<std::size_t>(descriptor)].generation);
+  ::epoll_ctl(epoll_.get(), EPOLL_CTL_MOD, descriptor, &event);
+}
+
+void MainLoop::unwatch(int descriptor) {
+  ::epoll_ctl(epoll_.get(), EPOLL_CTL_DEL, descriptor, nullptr);
+  // Moved out first: the handler's end may come back here.
+  const auto handler = std::move(slots_[static_cast<std::size_t>(descriptor)].handler);
+}
+
+void MainLoop::run() {
+  while (!stopping_.load(std::memory_order_relaxed)) {
+    queue_->run(kPiecesPerTurn);
+    for (TurnHook& hook : hooks_) {
+      hook();
+    }
+    flushAll();
+    waitForEvents();
+  }
+  flushAll();
+}
+
+void MainLoop::stop() {
+  stopping_.store(true, std::memory_order_relaxed);
+  queue_->wake();
+}
+
+void MainLoop::flushAll() {
+  flushing_.swap(flushes_);
+  for (const auto& handler : flushing_) {
+    handler->flush();
+  }
+  flushing_.clear();
+}
+
+void MainLoop::waitForEvents() {
+  std::array<epoll_event, kEventsPerTurn> events;
+  const auto timeout = flushes_.empty() ? queue_->prepareToSleep() : std::chrono::nanoseconds::zero();
+  progress_.setIdle(true);
+  const int count = ::epoll_wait(epoll_.get(), events.data(), kEventsPerTurn, milliseconds(timeout));
+  progress_.setIdle(false);
+  progress_.step();
+  queue_->awake();
+  for (int i = 0; i < count; ++i) {
+    const epoll_event& event = events[static_cast<std::size_t>(i)];
+    dispatch(event.data.u64, event.events);
+  }
+}
+
+void MainLoop::dispatch(std::uint64_t token, std::uint32_t events) {
+  const auto descriptor = static_cast<std::uint32_t>(token);
+  if (descriptor == static_cast<std::uint32_t>(queue_->wakeDescriptor())) {
+    queue_->drainWake();
+    return;
+  }
+  const Slot& slot = slots_[descriptor];
+  if (slot.generation != static_cast<std::uint32_t>(token >> 32)) {
+    return;  // closed earlier in this turn, and the number is another's by now
+  }
+  if (const std::shared_ptr<EventHandler> handler = slot.handler) {
+    handler->handleEvents(events);
+  }
+}
+
+}  // namespace tarn::linux_host

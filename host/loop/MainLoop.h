@@ -1,0 +1,93 @@
+// MainLoop: the one loop of the process. The thread that runs it serves the server queue and waits for the sockets, so
+// that a request and its reply never cross a thread.
+//
+//   one turn:  run waiting work (a bounded number of pieces) -> turn hooks -> flushes -> epoll_wait -> event handlers
+//
+// A round trip of a lone client is therefore three system calls: epoll_wait, recv, send. Work and sockets take turns,
+// so neither starves the other; a piece of work that blocks holds up the sockets, which slows clients and loses
+// nothing.
+//
+// Owned by the entry point; outlives what it watches. Threads: stop() and the queue any; the rest only the loop's
+// thread (or before run()).
+#pragma once
+
+#include <atomic>
+#include <cstdint>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "host/loop/QueueProgress.h"
+#include "host/loop/ServerQueue.h"
+#include "host/system/UniqueDescriptor.h"
+#include "platform/Clock.h"
+
+namespace tarn::linux_host {
+
+// What the loop calls. Held by the loop while a descriptor of it is watched or a flush is due.
+class EventHandler {
+ public:
+  virtual ~EventHandler() = default;
+  // `events` as epoll tells them.
+  virtual void handleEvents(std::uint32_t events) = 0;
+  // Asked for with flushLater(); called once, after the turn's work.
+  virtual void flush() {}
+};
+
+class MainLoop {
+ public:
+  // Something to look at once a turn, after the turn's work. Must be cheap.
+  using TurnHook = platform::UniqueFunction<void()>;
+
+  // The clock outlives the loop.
+  explicit MainLoop(const platform::Clock& clock);
+  MainLoop(const MainLoop&) = delete;
+  MainLoop& operator=(const MainLoop&) = delete;
+  ~MainLoop();
+
+  // Why the loop can't run (the system had no descriptors left); empty when it can.
+  const std::string& startError() const noexcept { return startError_; }
+
+  const std::shared_ptr<ServerQueue>& queue() const noexcept { return queue_; }
+  QueueProgress& progress() noexcept { return progress_; }
+  const platform::Clock& clock() const noexcept { return clock_; }
+
+  // Calls the handler for these events of the descriptor until unwatch(). Whether the system took it. A descriptor is
+  // unwatched before it is closed.
+  [[nodiscard]] bool watch(int descriptor, std::uint32_t events, std::shared_ptr<EventHandler> handler);
+  void change(int descriptor, std::uint32_t events);
+  void unwatch(int descriptor);
+
+  // Calls handler->flush() once, before the loop waits for events.
+  void flushLater(std::shared_ptr<EventHandler> handler) { flushes_.push_back(std::move(handler)); }
+  // Flushes at once what waits for the turn's end, for a turn that has none because the process ends in it.
+  void flushAll();
+  void addTurnHook(TurnHook hook) { hooks_.push_back(std::move(hook)); }
+
+  // Serves until stop(). Replies that are ready by then are flushed; work that waits then is left.
+  void run();
+  void stop();
+
+ private:
+  struct Slot {
+    std::shared_ptr<EventHandler> handler;
+    std::uint32_t generation = 0;  // tells a watched descriptor from an earlier one of the same number
+  };
+
+  void waitForEvents();
+  void dispatch(std::uint64_t token, std::uint32_t events);
+
+  const platform::Clock& clock_;
+  QueueProgress progress_;
+  std::shared_ptr<ServerQueue> queue_;
+  UniqueDescriptor epoll_;
+  std::string startError_;
+  std::atomic<bool> stopping_{false};
+
+  std::vector<Slot> slots_;  // by descriptor
+  std::vector<std::shared_ptr<EventHandler>> flushes_;
+  std::vector<std::shared_ptr<EventHandler>> flushing_;
+  std::vector<TurnHook> hooks_;
+};
+
+}  // namespace tarn::linux_host

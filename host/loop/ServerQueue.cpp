@@ -1,0 +1,147 @@
+#include "host/loop/ServerQueue.h"
+
+#include <sys/eventfd.h>
+
+#include <cerrno>
+#include <cstdint>
+
+#include "host/loop/CurrentQueue.h"
+
+namespace tarn::linux_host {
+
+namespace {
+
+// Room that a burst took is given back when it was for more pieces than this.
+constexpr std::size_t kKeptPieces = 16384;
+
+}  // namespace
+
+ServerQueue::ServerQueue(const platform::Clock& clock, QueueProgress& progress)
+    : clock_(clock), progress_(progress), wake_(::eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {}
+
+void ServerQueue::async(platform::Work work) {
+  bool wakeServer = false;
+  {
+    const std::lock_guard lock(mutex_);
+    incoming_.push_back(std::move(work));
+    ready_.fetch_add(1, std::memory_order_relaxed);
+    wakeServer = mustWake();
+  }
+  if (wakeServer) {
+    writeWake();
+  }
+}
+
+void ServerQueue::asyncAfter(std::chrono::nanoseconds delay, platform::Work work) {
+  if (delay <= std::chrono::nanoseconds::zero()) {
+    async(std::move(work));
+    return;
+  }
+  const auto deadline = deadlineAfter(clock_.monotonic(), delay);
+  bool wakeServer = false;
+  {
+    const std::lock_guard lock(mutex_);
+    delayed_.add(deadline, std::move(work));
+    wakeServer = deadline < sleepsUntil_ && mustWake();
+  }
+  if (wakeServer) {
+    writeWake();
+  }
+}
+
+bool ServerQueue::isCurrent() const noexcept {
+  return CurrentQueue::is(this);
+}
+
+std::size_t ServerQueue::waiting() const noexcept {
+  const std::lock_guard lock(mutex_);
+  return ready() + (delayed_.empty() ? 0 : delayed_.dueCount(clock_.monotonic()));
+}
+
+void ServerQueue::wake() {
+  bool wakeServer = false;
+  {
+    const std::lock_guard lock(mutex_);
+    lookAround_ = true;
+    wakeServer = mustWake();
+  }
+  if (wakeServer) {
+    writeWake();
+  }
+}
+
+std::size_t ServerQueue::run(std::size_t limit) {
+  const CurrentQueue current(this);
+  std::size_t count = 0;
+  while (count < limit && (next_ < batch_.size() || refill())) {
+    platform::Work work = std::move(batch_[next_++]);
+    ready_.fetch_sub(1, std::memory_order_relaxed);
+    progress_.step();
+    work();
+    ++count;
+  }
+  return count;
+}
+
+bool ServerQueue::refill() {
+  batch_.clear();
+  next_ = 0;
+  if (batch_.capacity() > kKeptPieces) {
+    batch_ = std::vector<platform::Work>();
+  }
+  const std::lock_guard lock(mutex_);
+  if (!delayed_.empty()) {
+    const auto now = clock_.monotonic();
+    while (delayed_.due(now)) {
+      incoming_.push_back(delayed_.take());
+      ready_.fetch_add(1, std::memory_order_relaxed);
+    }
+  }
+  batch_.swap(incoming_);
+  return !batch_.empty();
+}
+
+std::optional<std::chrono::nanoseconds> ServerQueue::prepareToSleep() {
+  using std::chrono::nanoseconds;
+  if (ready() != 0) {
+    return nanoseconds::zero();
+  }
+  const std::lock_guard lock(mutex_);
+  if (ready() != 0 || std::exchange(lookAround_, false)) {
+    return nanoseconds::zero();
+  }
+  std::optional<nanoseconds> timeout;
+  sleepsUntil_ = nanoseconds::max();
+  if (!delayed_.empty()) {
+    const auto now = clock_.monotonic();
+    if (delayed_.due(now)) {
+      return nanoseconds::zero();
+    }
+    sleepsUntil_ = delayed_.deadline();
+    timeout = sleepsUntil_ - now;
+  }
+  sleeping_ = true;
+  return timeout;
+}
+
+void ServerQueue::awake() {
+  const std::lock_guard lock(mutex_);
+  sleeping_ = false;
+}
+
+void ServerQueue::drainWake() noexcept {
+  std::uint64_t count = 0;
+  [[maybe_unused]] const auto bytes = ::read(wake_.get(), &count, sizeof count);
+}
+
+bool ServerQueue::mustWake() noexcept {
+  return std::exchange(sleeping_, false);  // one write is enough
+}
+
+void ServerQueue::writeWake() noexcept {
+  const std::uint64_t one = 1;
+  while (::write(wake_.get(), &one, sizeof one) < 0 && errno == EINTR) {
+  }
+}
+
+}  // namespace tarn::linux_host

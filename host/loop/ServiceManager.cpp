@@ -1,0 +1,27 @@
+#include "host/loop/ServiceManager.h"
+
+#include <systemd/sd-daemon.h>
+
+namespace tarn::linux_host {
+
+void ServiceManager::notifyReady() {
+  sd_notify(0, "READY=1");
+}
+
+void ServiceManager::notifyStopping() {
+  sd_notify(0, "STOPPING=1");
+}
+
+void ServiceManager::notifyWatchdog() {
+  sd_notify(0, "WATCHDOG=1");
+}
+
+std::optional<std::chrono::microseconds> ServiceManager::watchdogInterval() const {
+  std::uint64_t microseconds = 0;
+  if (sd_watchdog_enabled(0, &microseconds) <= 0) {
+    return std::nullopt;
+  }
+  return std::chrono::microseconds(microseconds);
+}
+
+}  // namespace tarn::linux_host

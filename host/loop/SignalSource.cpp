@@ -1,0 +1,48 @@
+#include "host/loop/SignalSource.h"
+
+#include <sys/epoll.h>
+#include <sys/signalfd.h>
+
+#include <cerrno>
+#include <csignal>
+
+#include "host/log/HostLog.h"
+
+namespace tarn::linux_host {
+
+namespace {
+
+sigset_t endingSignals() {
+  sigset_t signals;
+  sigemptyset(&signals);
+  sigaddset(&signals, SIGTERM);
+  sigaddset(&signals, SIGINT);
+  return signals;
+}
+
+}  // namespace
+
+SignalSource::SignalSource() {
+  const sigset_t signals = endingSignals();
+  pthread_sigmask(SIG_BLOCK, &signals, nullptr);
+  std::signal(SIGPIPE, SIG_IGN);
+}
+
+std::string SignalSource::start(const std::shared_ptr<SignalSource>& source, MainLoop& loop, Handler handler) {
+  const sigset_t signals = endingSignals();
+  source->handler_ = std::move(handler);
+  source->descriptor_ = UniqueDescriptor(::signalfd(-1, &signals, SFD_CLOEXEC | SFD_NONBLOCK));
+  if (!source->descriptor_ || !loop.watch(source->descriptor_.get(), EPOLLIN, source)) {
+    return "can't receive signals" + errorSuffix(errno);
+  }
+  return {};
+}
+
+void SignalSource::handleEvents(std::uint32_t) {
+  signalfd_siginfo info{};
+  while (::read(descriptor_.get(), &info, sizeof info) == static_cast<ssize_t>(sizeof info)) {
+    handler_(static_cast<int>(info.ssi_signo));
+  }
+}
+
+}  // namespace tarn::linux_host

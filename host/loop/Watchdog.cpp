@@ -1,0 +1,54 @@
+#include "host/loop/Watchdog.h"
+
+namespace tarn::linux_host {
+
+bool queueIsAlive(const QueueProgress::Sample& before, const QueueProgress::Sample& now,
+                  std::chrono::nanoseconds monotonicNow) noexcept {
+  if (now.steps != before.steps || now.idle) {
+    return true;
+  }
+  return now.waitingSince && monotonicNow - *now.waitingSince < kLongestDeliberateWait;
+}
+
+Watchdog::Watchdog(const platform::Clock& clock, const QueueProgress& progress, ServiceManager& manager)
+    : clock_(clock), progress_(progress), manager_(manager) {}
+
+void Watchdog::start() {
+  const auto interval = manager_.watchdogInterval();
+  if (!interval || thread_.joinable()) {
+    return;
+  }
+  thread_ = std::thread([this, period = *interval / 2] { serve(period); });
+}
+
+void Watchdog::stop() {
+  {
+    const std::lock_guard lock(mutex_);
+    stopping_ = true;
+  }
+  changed_.notify_all();
+  if (thread_.joinable()) {
+    thread_.join();
+  }
+}
+
+bool Watchdog::check() {
+  const auto now = progress_.sample();
+  const bool alive = queueIsAlive(before_, now, clock_.monotonic());
+  before_ = now;
+  if (alive) {
+    manager_.notifyWatchdog();
+  }
+  return alive;
+}
+
+void Watchdog::serve(std::chrono::microseconds period) {
+  std::unique_lock lock(mutex_);
+  while (!changed_.wait_for(lock, period, [this] { return stopping_; })) {
+    lock.unlock();
+    check();
+    lock.lock();
+  }
+}
+
+}  // namespace tarn::linux_host

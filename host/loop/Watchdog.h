@@ -1,0 +1,53 @@
+// Watchdog: tells the service manager, when it asks for that, that the server queue is alive. A queue that hangs gets
+// no ping, and the manager restarts the service.
+//
+// Owned by the entry point. start() makes a thread of its own, so that a busy queue can be told from a hung one.
+#pragma once
+
+#include <chrono>
+#include <condition_variable>
+#include <mutex>
+#include <thread>
+
+#include "host/loop/QueueProgress.h"
+#include "host/loop/ServiceManager.h"
+#include "platform/Clock.h"
+
+namespace tarn::linux_host {
+
+// The longest that work may block the queue on purpose, and what its end may take to be seen.
+inline constexpr std::chrono::nanoseconds kLongestDeliberateWait = std::chrono::seconds(180 + 5);
+
+// Whether the queue is alive: it did something since the sample before, has nothing to do, or waits on purpose and not
+// yet too long.
+bool queueIsAlive(const QueueProgress::Sample& before, const QueueProgress::Sample& now,
+                  std::chrono::nanoseconds monotonicNow) noexcept;
+
+class Watchdog {
+ public:
+  // All outlive the watchdog.
+  Watchdog(const platform::Clock& clock, const QueueProgress& progress, ServiceManager& manager);
+  Watchdog(const Watchdog&) = delete;
+  Watchdog& operator=(const Watchdog&) = delete;
+  ~Watchdog() { stop(); }
+
+  // Pings at half the manager's interval while the queue is alive. Does nothing when the manager didn't ask.
+  void start();
+  void stop();
+  // One look at the queue, with a ping when it is alive. Whether it was. The thread's own step.
+  bool check();
+
+ private:
+  void serve(std::chrono::microseconds period);
+
+  const platform::Clock& clock_;
+  const QueueProgress& progress_;
+  ServiceManager& manager_;
+  QueueProgress::Sample before_;  // of the last look
+  std::mutex mutex_;
+  std::condition_variable changed_;
+  bool stopping_ = false;  // guarded by mutex_
+  std::thread thread_;
+};
+
+}  // namespace tarn::linux_host

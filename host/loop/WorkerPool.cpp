@@ -1,0 +1,303 @@
+#include "host/loop/WorkerPool.h"
+
+#include <algorithm>
+#include <cstdio>
+#include <cstdlib>
+#include <iterator>
+#include <system_error>
+
+#include "host/loop/CurrentQueue.h"
+
+namespace tarn::linux_host {
+
+namespace {
+
+using std::chrono::nanoseconds;
+
+// Pieces of one queue that a thread runs before the next queue has its turn.
+constexpr std::size_t kPiecesPerTurn = 64;
+// How soon a thread without work looks again by itself, once.
+constexpr nanoseconds kLookAgain = std::chrono::microseconds(500);
+// The longest sleep: a bound that keeps the arithmetic of the system's timed waits in range.
+constexpr nanoseconds kLongestSleep = std::chrono::hours(1);
+// Room that a burst took is given back when it was for more pieces than this.
+constexpr std::size_t kKeptPieces = 16;
+
+// Work that is handed over must run; without a thread for it the process is of no use.
+[[noreturn]] void endForWantOfThreads() {
+  static_cast<void>(std::fputs("thread constructor failed\n", stderr));
+  std::abort();
+}
+
+void runOne(WorkerPool::Line& line, platform::Work work) {
+  line.waiting.fetch_sub(1, std::memory_order_relaxed);
+  work();
+}
+
+}  // namespace
+
+void WorkerPool::start(std::size_t threads) {
+  const std::lock_guard lock(mutex_);
+  if (!threads_.empty() || stopping_) {
+    return;
+  }
+  try {
+    for (std::size_t i = 0; i < threads; ++i) {
+      threads_.emplace_back([this] { serve(); });
+    }
+  } catch (const std::system_error&) {
+    endForWantOfThreads();
+  }
+}
+
+void WorkerPool::stop() {
+  std::vector<std::thread> threads;
+  {
+    const std::lock_guard lock(mutex_);
+    stopping_ = true;
+    threads.swap(threads_);
+  }
+  changed_.notify_all();
+  ended_.notify_all();
+  for (std::thread& thread : threads) {
+    thread.join();
+  }
+  destroyWhatIsLeft();
+}
+
+// Work holds its queue as a rule, and the queue holds its work: nobody else would ever let go of either.
+void WorkerPool::destroyWhatIsLeft() {
+  // Destroyed behind the lock: its end may come back here.
+  std::vector<platform::Work> left;
+  DelayedWork<Delayed> delayed;
+  const std::lock_guard lock(mutex_);
+  over_ = true;
+  std::swap(delayed, delayed_);
+  for (auto& [moment, line] : suspensions_) {
+    left.push_back(std::move(line->next));
+    for (auto* pieces : {&line->taken, &line->incoming}) {
+      std::move(pieces->begin(), pieces->end(), std::back_inserter(left));
+      pieces->clear();
+    }
+    line->position = 0;
+    line->suspension.reset();
+  }
+  suspensions_.clear();
+}
+
+void WorkerPool::add(const std::shared_ptr<Line>& line, platform::Work work) {
+  const std::lock_guard lock(mutex_);
+  if (!over_) {
+    enqueue(line, std::move(work));
+  }
+}
+
+void WorkerPool::addAfter(const std::shared_ptr<Line>& line, nanoseconds delay, platform::Work work) {
+  const std::lock_guard lock(mutex_);
+  if (over_) {
+    return;
+  }
+  if (delay <= nanoseconds::zero()) {
+    enqueue(line, std::move(work));
+    return;
+  }
+  delayed_.add(deadlineAfter(clock_.monotonic(), delay), Delayed(line, std::move(work)));
+  watchNextMoment();
+}
+
+void WorkerPool::suspend(const std::shared_ptr<Line>& line, nanoseconds longest, platform::Work next) {
+  line->interrupted = true;
+  const std::lock_guard lock(mutex_);
+  const auto moment = deadlineAfter(clock_.monotonic(), std::max(longest, nanoseconds::zero()));
+  line->next = std::move(next);
+  line->suspension = suspensions_.emplace(std::pair(moment, nextSuspension_++), line).first;
+  countUnfinished();
+  watchNextMoment();
+}
+
+void WorkerPool::resume(const std::shared_ptr<Line>& line) {
+  const std::lock_guard lock(mutex_);
+  if (line->suspension) {
+    endSuspension(*line->suspension);
+  }
+}
+
+std::size_t WorkerPool::unfinished() const {
+  const std::lock_guard lock(mutex_);
+  return unfinished_;
+}
+
+bool WorkerPool::settle(nanoseconds longest) {
+  Lock lock(mutex_);
+  return settled_.wait_for(lock, std::min(longest, kLongestSleep), [this] { return unfinished_ == 0; });
+}
+
+void WorkerPool::enqueue(const std::shared_ptr<Line>& line, platform::Work work) {
+  line->incoming.push_back(std::move(work));
+  line->waiting.fetch_add(1, std::memory_order_relaxed);
+  countUnfinished();
+  if (!line->scheduled && !line->suspension) {
+    schedule(line);
+  }
+}
+
+void WorkerPool::countUnfinished() {
+  if (++unfinished_ >= marks_.high) {
+    full_.store(true, std::memory_order_relaxed);
+  }
+}
+
+void WorkerPool::schedule(const std::shared_ptr<Line>& line) {
+  line->scheduled = true;
+  runnable_.push_back(line);
+  if (!looking_) {
+    wakeOne();
+  }
+}
+
+void WorkerPool::endSuspension(Suspensions::iterator suspension) {
+  const auto line = std::move(suspension->second);
+  suspensions_.erase(suspension);
+  line->suspension.reset();
+  line->waiting.fetch_add(1, std::memory_order_relaxed);
+  if (!line->scheduled) {  // else the piece that suspended it still runs
+    schedule(line);
+  }
+}
+
+void WorkerPool::takeDue() {
+  if (delayed_.empty() && suspensions_.empty()) {
+    return;
+  }
+  const auto now = clock_.monotonic();
+  while (delayed_.due(now)) {
+    auto [line, work] = delayed_.take();
+    enqueue(line, std::move(work));
+  }
+  while (!suspensions_.empty() && suspensions_.begin()->first.first <= now) {
+    endSuspension(suspensions_.begin());
+  }
+}
+
+std::optional<nanoseconds> WorkerPool::nextMoment() const {
+  std::optional<nanoseconds> moment;
+  if (!delayed_.empty()) {
+    moment = delayed_.deadline();
+  }
+  if (!suspensions_.empty()) {
+    moment = std::min(moment.value_or(nanoseconds::max()), suspensions_.begin()->first.first);
+  }
+  return moment;
+}
+
+void WorkerPool::wakeOne() {
+  if (!wakeUps_.empty()) {
+    changed_.notify_one();
+  }
+}
+
+// While a thread sleeps, one must wake by the earliest moment. Whoever is about to look goes to sleep knowing it.
+void WorkerPool::watchNextMoment() {
+  const auto moment = nextMoment();
+  if (moment && !looking_ && (wakeUps_.empty() || *wakeUps_.begin() > *moment)) {
+    wakeOne();
+  }
+}
+
+void WorkerPool::serve() {
+  Lock lock(mutex_);
+  bool worked = false;
+  for (;;) {
+    takeDue();
+    if (!runnable_.empty()) {
+      const auto line = std::move(runnable_.front());
+      runnable_.pop_front();
+      // Another for what this thread leaves: more work, or a moment that nobody would wait for.
+      if (!runnable_.empty()) {
+        wakeOne();
+      } else {
+        watchNextMoment();
+      }
+      worked = true;
+      runSome(line, lock);
+    } else if (stopping_) {
+      return;
+    } else if (std::exchange(worked, false) && !looking_) {
+      look(lock);
+    } else {
+      sleep(lock);
+    }
+  }
+}
+
+void WorkerPool::look(Lock& lock) {
+  looking_ = true;
+  auto longest = kLookAgain;
+  if (const auto moment = nextMoment()) {
+    longest = std::min(longest, *moment - clock_.monotonic());
+  }
+  ended_.wait_for(lock, longest);
+  looking_ = false;
+}
+
+void WorkerPool::sleep(Lock& lock) {
+  const auto moment = nextMoment();
+  const auto wakeUp = wakeUps_.insert(moment.value_or(nanoseconds::max()));
+  if (moment) {
+    changed_.wait_for(lock, std::min(*moment - clock_.monotonic(), kLongestSleep));
+  } else {
+    changed_.wait(lock);
+  }
+  wakeUps_.erase(wakeUp);
+}
+
+void WorkerPool::runSome(const std::shared_ptr<Line>& line, Lock& lock) {
+  platform::Work next = std::move(line->next);
+  if (line->position == line->taken.size()) {
+    line->taken.clear();
+    line->position = 0;
+    line->taken.swap(line->incoming);
+  }
+  lock.unlock();
+  const std::size_t finished = runTurn(*line, std::move(next));
+  lock.lock();
+  const bool more = line->next || line->position < line->taken.size() || !line->incoming.empty();
+  line->scheduled = more && !line->suspension;
+  if (line->scheduled) {
+    runnable_.push_back(line);
+  }
+  account(finished, lock);
+}
+
+std::size_t WorkerPool::runTurn(Line& line, platform::Work next) {
+  const CurrentQueue current(&line);
+  std::size_t finished = 0;
+  if (next) {
+    runOne(line, std::move(next));
+    ++finished;
+  }
+  while (!line.interrupted && finished < kPiecesPerTurn && line.position < line.taken.size()) {
+    runOne(line, std::move(line.taken[line.position++]));
+    ++finished;
+  }
+  line.interrupted = false;
+  if (line.position == line.taken.size() && line.taken.capacity() > kKeptPieces) {
+    line.taken = std::vector<platform::Work>();
+    line.position = 0;
+  }
+  return finished;
+}
+
+void WorkerPool::account(std::size_t finished, Lock& lock) {
+  unfinished_ -= finished;
+  if (unfinished_ == 0) {
+    settled_.notify_all();
+  }
+  if (unfinished_ <= marks_.low && full_.exchange(false, std::memory_order_relaxed) && roomHandler_) {
+    lock.unlock();
+    roomHandler_();
+    lock.lock();
+  }
+}
+
+}  // namespace tarn::linux_host

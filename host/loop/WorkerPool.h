@@ -1,0 +1,132 @@
+// WorkerPool: the few threads that run all serial queues but the server queue.
+//
+// A queue is either idle, or stands once in the pool's line, or is run by one thread, or is suspended: so its work
+// never overlaps and keeps its order, whichever thread runs it. A thread takes over what a queue holds, runs a handful
+// of pieces without the pool's lock, then the queue goes to the end of the line. Delayed work and the ends of
+// suspensions are kept by the pool and handed to their queues at their moments.
+//
+// Which problem: the server queue hands over a piece for every message, and waking a thread is dearer than the piece.
+// How: a thread that runs out of work looks again by itself after half a millisecond before it goes to sleep; while one
+// is about to look, nobody is woken. Whoever finds more than it can do alone wakes another.
+//
+// Owned by LinuxWorkQueues; queues hold it too, as they may outlive that. Threads: any.
+#pragma once
+
+#include <atomic>
+#include <chrono>
+#include <condition_variable>
+#include <cstddef>
+#include <cstdint>
+#include <deque>
+#include <map>
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <set>
+#include <thread>
+#include <utility>
+#include <vector>
+
+#include "host/loop/DelayedWork.h"
+#include "platform/Clock.h"
+#include "platform/WorkQueue.h"
+
+namespace tarn::linux_host {
+
+class WorkerPool {
+ public:
+  // Pieces of work that are not finished, of all queues: from the high mark on isFull() is true, until the low mark is
+  // reached. A piece and the message that it holds take some hundred bytes.
+  struct Marks {
+    std::size_t high = 262'144;
+    std::size_t low = 131'072;
+  };
+  using RoomHandler = platform::UniqueFunction<void()>;
+
+  struct Line;
+
+  // The clock outlives the pool.
+  WorkerPool(const platform::Clock& clock, Marks marks) : clock_(clock), marks_(marks) {}
+  WorkerPool(const WorkerPool&) = delete;
+  WorkerPool& operator=(const WorkerPool&) = delete;
+  ~WorkerPool() { stop(); }
+
+  // Called on a thread of the pool each time isFull() has become false again. Set before start().
+  void setRoomHandler(RoomHandler handler) { roomHandler_ = std::move(handler); }
+  // Starts the threads, once; later calls do nothing. A system that has no more threads to give ends the process.
+  void start(std::size_t threads);
+  // Runs what is ready, then ends the threads. What is delayed, what is suspended and what comes later is destroyed
+  // uncalled.
+  void stop();
+
+  void add(const std::shared_ptr<Line>& line, platform::Work work);
+  void addAfter(const std::shared_ptr<Line>& line, std::chrono::nanoseconds delay, platform::Work work);
+  // By work of the line.
+  void suspend(const std::shared_ptr<Line>& line, std::chrono::nanoseconds longest, platform::Work next);
+  void resume(const std::shared_ptr<Line>& line);
+
+  // Pieces handed over and not yet finished, of all queues; what is suspended counts, what is delayed does not.
+  std::size_t unfinished() const;
+  bool isFull() const noexcept { return full_.load(std::memory_order_relaxed); }
+  // Waits until nothing is unfinished; false when `longest` passed first.
+  [[nodiscard]] bool settle(std::chrono::nanoseconds longest);
+
+ private:
+  using Lock = std::unique_lock<std::mutex>;
+  using Delayed = std::pair<std::shared_ptr<Line>, platform::Work>;
+  // By deadline, equal ones in the order of the calls.
+  using Suspensions = std::map<std::pair<std::chrono::nanoseconds, std::uint64_t>, std::shared_ptr<Line>>;
+
+  void serve();
+  void destroyWhatIsLeft();
+  static std::size_t runTurn(Line& line, platform::Work next);
+  // Under the lock.
+  void enqueue(const std::shared_ptr<Line>& line, platform::Work work);
+  void schedule(const std::shared_ptr<Line>& line);
+  void endSuspension(Suspensions::iterator suspension);
+  void takeDue();
+  std::optional<std::chrono::nanoseconds> nextMoment() const;
+  void countUnfinished();
+  void wakeOne();
+  void watchNextMoment();
+  void look(Lock& lock);
+  void sleep(Lock& lock);
+  void runSome(const std::shared_ptr<Line>& line, Lock& lock);
+  void account(std::size_t finished, Lock& lock);
+
+  const platform::Clock& clock_;
+  const Marks marks_;
+  RoomHandler roomHandler_;
+  std::atomic<bool> full_{false};
+  mutable std::mutex mutex_;         // guards what follows, and of the lines what they say
+  std::condition_variable changed_;  // for the sleepers
+  std::condition_variable ended_;    // for the one that is about to look
+  std::condition_variable settled_;
+  std::deque<std::shared_ptr<Line>> runnable_;
+  DelayedWork<Delayed> delayed_;
+  Suspensions suspensions_;
+  std::uint64_t nextSuspension_ = 0;
+  std::size_t unfinished_ = 0;
+  std::vector<std::thread> threads_;
+  std::multiset<std::chrono::nanoseconds> wakeUps_;  // of the sleepers: when each wakes at the latest
+  bool looking_ = false;
+  bool stopping_ = false;
+  bool over_ = false;  // the threads are gone
+};
+
+// The state of one queue. Lives as long as the queue or work for it.
+struct WorkerPool::Line {
+  // Under the pool's lock.
+  std::vector<platform::Work> incoming;
+  platform::Work next;  // what runs first when a suspension is over
+  std::optional<Suspensions::iterator> suspension;
+  bool scheduled = false;  // stands in the pool's line or is being run
+  // Of the thread that runs the line.
+  std::vector<platform::Work> taken;
+  std::size_t position = 0;
+  bool interrupted = false;  // suspended by the piece that runs
+  // Pieces handed over and not yet begun.
+  std::atomic<std::size_t> waiting{0};
+};
+
+}  // namespace tarn::linux_host

@@ -1,0 +1,54 @@
+#include "host/settings/JsonDeviceProperties.h"
+
+#include <algorithm>
+#include <array>
+#include <cstddef>
+#include <utility>
+
+#include "host/log/HostLog.h"
+#include "host/system/JsonValues.h"
+#include "host/system/SmallFile.h"
+
+namespace tarn::linux_host {
+
+namespace {
+
+constexpr std::size_t kMaximumFileBytes = std::size_t{1} << 20U;
+constexpr std::array<std::string_view, 2> kKnown{"InternalBuild", "haptics"};
+
+}  // namespace
+
+JsonDeviceProperties::JsonDeviceProperties() : properties_{{"InternalBuild", false}, {"haptics", false}} {}
+
+std::string JsonDeviceProperties::load(const std::string& path) {
+  const SmallFile file = readSmallFile(path, kMaximumFileBytes);
+  if (file.error != 0) {
+    return path + errorSuffix(file.error);
+  }
+  const JsonReading reading = readJson(file.content);
+  if (reading.fault) {
+    return path + ":" + reading.fault->description();
+  }
+  if (reading.value.kind() != plist::Kind::Dictionary) {
+    return path + ":1:1: device properties are one JSON object";
+  }
+  const plist::Dictionary read = reading.value.view().dictionary();
+  std::size_t member = 0;
+  for (const plist::Dictionary::Entry& entry : read) {
+    const bool known = std::find(kKnown.begin(), kKnown.end(), entry.key.text()) != kKnown.end();
+    if (known && entry.value.kind() != plist::Kind::Bool) {
+      return path + ":" + std::to_string(reading.memberLines[member]) + ": \"" + std::string(entry.key.text()) +
+             "\" must be true or false";
+    }
+    ++member;
+  }
+  properties_ = read;
+  return {};
+}
+
+std::optional<bool> JsonDeviceProperties::boolean(std::string_view name) const {
+  const plist::ValueView value = properties_.get(name);
+  return value.kind() == plist::Kind::Bool ? std::optional(value.boolValue()) : std::nullopt;
+}
+
+}  // namespace tarn::linux_host

@@ -1,0 +1,117 @@
+#include "host/settings/ServiceOptions.h"
+
+#include <CLI/CLI.hpp>
+#include <algorithm>
+
+#include "host/log/LogLine.h"
+
+namespace tarn::linux_host {
+
+namespace {
+
+constexpr const char* kProgram = "tarnreportingd";
+constexpr const char* kVersion = "tarnreportingd " TARN_VERSION;
+constexpr const char* kPurpose = "Gathers audio analytics: serves reporting sessions to the clients that connect.";
+constexpr const char* kFooter =
+    "The listener is the socket that the service manager hands over (LISTEN_FDS), else --socket. SIGTERM and SIGINT "
+    "end\n"
+    "the service once everything that it recorded is on disk.\n"
+    "\n"
+    "Exit status: 0 after SIGTERM, SIGINT, --help and --version; 1 when it can't serve (the state directory, the "
+    "socket\n"
+    "or the log can't be used, or another service is live on the socket); 2 when a client ended it; 64 for wrong "
+    "usage;\n"
+    "78 for a wrong configuration or device-properties file.";
+
+struct RawOptions {
+  std::string socketPath;
+  std::string stateDirectory;
+  std::string configurationFile;
+  std::string devicePropertiesFile;
+  std::string logLevel = "default";
+  std::string logTarget = "stderr";
+};
+
+std::string checkNotEmpty(const std::string& text) {
+  return text.empty() ? "must not be empty" : "";
+}
+
+std::string checkLevel(const std::string& name) {
+  return logLevelFromName(name) ? "" : "\"" + name + "\" is none of debug, info, default, error";
+}
+
+void addOptions(CLI::App& app, RawOptions& raw) {
+  app.add_option("--socket", raw.socketPath,
+                 "Socket to listen on (default: $XDG_RUNTIME_DIR/tarnreporting.sock, for root "
+                 "/run/tarnreporting/socket)")
+      ->type_name("PATH")
+      ->check(checkNotEmpty);
+  app.add_option("--state-dir", raw.stateDirectory,
+                 "Where the recorder, defaults, notifications and reports are kept (default: "
+                 "$XDG_STATE_HOME/tarnreporting, without it ~/.local/state/tarnreporting, for root "
+                 "/var/lib/tarnreporting)")
+      ->type_name("DIR")
+      ->check(checkNotEmpty);
+  app.add_option("--config", raw.configurationFile, "Configuration file, TOML (default: none)")
+      ->type_name("FILE")
+      ->check(checkNotEmpty);
+  app.add_option("--device-properties", raw.devicePropertiesFile,
+                 "What the device is, JSON (default: none, which is {\"InternalBuild\": false, \"haptics\": false})")
+      ->type_name("FILE")
+      ->check(checkNotEmpty);
+  app.add_option("--log-level", raw.logLevel,
+                 "Least level that is logged: debug, info, default or error (default: default)")
+      ->type_name("LEVEL")
+      ->check(checkLevel);
+  app.add_option("--log-target", raw.logTarget,
+                 "Where the log goes: stderr, journal, or a file that is appended to (default: stderr)")
+      ->type_name("stderr|journal|FILE")
+      ->check(checkNotEmpty);
+}
+
+ServiceCommand refuse(std::string text) {
+  std::replace(text.begin(), text.end(), '\n', ' ');
+  return {std::nullopt, kExitUsage, {}, std::string(kProgram) + ": " + text + "\n"};
+}
+
+std::optional<std::string> orNothing(const std::string& text) {
+  return text.empty() ? std::nullopt : std::optional(text);
+}
+
+}  // namespace
+
+ServiceCommand parseServiceCommand(int argumentCount, const char* const* arguments,
+                                   const HostEnvironment& environment) {
+  CLI::App app(kPurpose, kProgram);
+  RawOptions raw;
+  addOptions(app, raw);
+  app.set_help_flag("--help", "Print this help and exit");
+  app.set_version_flag("--version", kVersion, "Print the version and exit");
+  app.footer(kFooter);
+  app.get_formatter()->column_width(38);
+  try {
+    app.parse(argumentCount, arguments);
+  } catch (const CLI::CallForHelp&) {
+    return {std::nullopt, kExitSuccess, app.help(), {}};
+  } catch (const CLI::CallForVersion&) {
+    return {std::nullopt, kExitSuccess, std::string(kVersion) + "\n", {}};
+  } catch (const CLI::ParseError& fault) {
+    return refuse(fault.what());
+  }
+  ServiceOptions options;
+  const std::optional<std::string> stateDirectory =
+      raw.stateDirectory.empty() ? defaultStateDirectory(environment) : std::optional(raw.stateDirectory);
+  if (!stateDirectory) {
+    return refuse("--state-dir: must be given, neither XDG_STATE_HOME nor HOME names a folder");
+  }
+  options.socketPath = raw.socketPath.empty() ? defaultSocketPath(environment) : std::optional(raw.socketPath);
+  options.socketIsDefault = raw.socketPath.empty();
+  options.stateDirectory = *stateDirectory;
+  options.configurationFile = orNothing(raw.configurationFile);
+  options.devicePropertiesFile = orNothing(raw.devicePropertiesFile);
+  options.logLevel = *logLevelFromName(raw.logLevel);
+  options.logTarget = raw.logTarget;
+  return {std::move(options), kExitSuccess, {}, {}};
+}
+
+}  // namespace tarn::linux_host

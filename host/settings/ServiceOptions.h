@@ -1,0 +1,39 @@
+// ServiceOptions: the command line of tarnreportingd. Threads: one at a time.
+#pragma once
+
+#include <optional>
+#include <string>
+
+#include "host/settings/HostPaths.h"
+#include "platform/Log.h"
+
+namespace tarn::linux_host {
+
+// Exit statuses of the service.
+inline constexpr int kExitSuccess = 0;
+inline constexpr int kExitFailure = 1;         // it can't serve: state directory, socket, log
+inline constexpr int kExitKilled = 2;          // a client asked for the end
+inline constexpr int kExitUsage = 64;          // wrong options
+inline constexpr int kExitConfiguration = 78;  // a wrong configuration or device-properties file
+
+struct ServiceOptions {
+  std::optional<std::string> socketPath;  // nothing: none named and no default, so the listener must be handed over
+  bool socketIsDefault = false;           // then its folder is the service's own to make
+  std::string stateDirectory;
+  std::optional<std::string> configurationFile;
+  std::optional<std::string> devicePropertiesFile;
+  platform::LogLevel logLevel = platform::LogLevel::Default;
+  std::string logTarget = "stderr";
+};
+
+// What a command line asks for.
+struct ServiceCommand {
+  std::optional<ServiceOptions> options;  // nothing: print what there is and exit with the status
+  int exitStatus = kExitSuccess;
+  std::string output;     // for stdout: the help or the version
+  std::string complaint;  // for stderr: one line that names the option, with its line end
+};
+
+ServiceCommand parseServiceCommand(int argumentCount, const char* const* arguments, const HostEnvironment& environment);
+
+}  // namespace tarn::linux_host

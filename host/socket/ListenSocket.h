@@ -1,0 +1,65 @@
+// ListenSocket: the socket on which clients reach the service: handed over by the service manager, or bound to a path.
+//
+// A path belongs to one service at a time. Who holds the lock on PATH.lock may replace a stale socket file and remove
+// its own at the end, so two services that start at once never take each other's file away. A socket that somebody
+// listens on is never replaced, nor is a file that is no socket.
+//
+// Owned by the listener. Threads: one at a time.
+#pragma once
+
+#include <sys/types.h>
+
+#include <optional>
+#include <string>
+
+#include "host/system/UniqueDescriptor.h"
+
+namespace tarn::linux_host {
+
+class ListenSocket {
+ public:
+  static constexpr mode_t kDefaultMode = 0660;
+
+  struct Result;
+
+  ListenSocket() = default;
+  ListenSocket(ListenSocket&& other) noexcept;
+  ListenSocket& operator=(ListenSocket&& other) noexcept;
+  ListenSocket(const ListenSocket&) = delete;
+  ListenSocket& operator=(const ListenSocket&) = delete;
+  // Closes it; a socket file that listen() made is removed when it is still the same one.
+  ~ListenSocket();
+
+  // The socket that the service manager handed over (LISTEN_FDS), taken out of the environment. Neither socket nor
+  // error when it handed over none; an error when it is more than one or not a listening Unix stream socket.
+  static Result takeHandedOver();
+  // The right to this path, which no other service gets from here on. Nothing is there to connect to before listen().
+  static Result claim(const std::string& path);
+  // Listens at the claimed path, with this file mode before anybody can connect; one that was handed over listens
+  // already. What went wrong, or nothing.
+  [[nodiscard]] std::string listen(mode_t mode = kDefaultMode);
+  // Both in one.
+  static Result bindTo(const std::string& path, mode_t mode = kDefaultMode);
+
+  int descriptor() const noexcept { return socket_.get(); }
+  // Whether there is one, claimed or listening.
+  explicit operator bool() const noexcept { return socket_ || lock_; }
+  // "/run/x/socket", or "handed over".
+  const std::string& name() const noexcept { return name_; }
+
+ private:
+  void close() noexcept;
+
+  UniqueDescriptor socket_;
+  UniqueDescriptor lock_;  // held while the file is ours
+  std::string name_;
+  dev_t device_ = 0;  // with the inode: which file is ours
+  ino_t inode_ = 0;
+};
+
+struct ListenSocket::Result {
+  ListenSocket socket;
+  std::string error;  // one line that names the path; empty when nothing went wrong
+};
+
+}  // namespace tarn::linux_host

@@ -1,0 +1,94 @@
+#include "host/socket/SocketListener.h"
+
+#include <sys/epoll.h>
+#include <sys/socket.h>
+
+#include <cerrno>
+
+#include "host/log/HostLog.h"
+#include "host/socket/SocketConnection.h"
+
+namespace tarn::linux_host {
+
+namespace {
+
+constexpr std::string_view kModule = "SocketListener";
+// Clients that are accepted before others have their turn.
+constexpr int kAcceptsPerTurn = 32;
+// How long accepting rests when there is no room.
+constexpr std::chrono::milliseconds kAcceptPause{50};
+
+}  // namespace
+
+SocketListener::SocketListener(ConnectionHost& host, ListenSocket socket) : host_(host), socket_(std::move(socket)) {}
+
+SocketListener::~SocketListener() = default;
+
+void SocketListener::resume() {
+  hostLog(host_.log, kHostCategory, platform::LogLevel::Default, kModule, "listening on " + socket_.name());
+  startAccepting();
+}
+
+void SocketListener::close() {
+  if (std::exchange(accepting_, false)) {
+    host_.loop.unwatch(socket_.descriptor());
+  }
+  socket_ = ListenSocket();
+}
+
+void SocketListener::startAccepting() {
+  if (accepting_ || !socket_) {
+    return;
+  }
+  accepting_ = host_.loop.watch(socket_.descriptor(), EPOLLIN, shared_from_this());
+  if (!accepting_) {
+    pauseAccepting("can't wait for clients" + errorSuffix(errno));
+  }
+}
+
+void SocketListener::handleEvents(std::uint32_t) {
+  for (int count = 0; count < kAcceptsPerTurn && accepting_; ++count) {
+    if (host_.ledger.connectionsOpen >= host_.limits.maxConnections) {
+      pauseAccepting(std::to_string(host_.ledger.connectionsOpen) + " connections are open, no more are allowed");
+      return;
+    }
+    UniqueDescriptor client(::accept4(socket_.descriptor(), nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
+    if (client) {
+      take(std::move(client));
+    } else if (errno == EAGAIN) {
+      return;
+    } else if (errno != EINTR && errno != ECONNABORTED) {
+      pauseAccepting("can't accept a client" + errorSuffix(errno));
+      return;
+    }
+  }
+}
+
+void SocketListener::pauseAccepting(const std::string& why) {
+  if (std::exchange(accepting_, false)) {
+    host_.loop.unwatch(socket_.descriptor());
+  }
+  ++host_.ledger.acceptPauses;
+  if (!std::exchange(shortage_, true)) {
+    hostLog(host_.log, kHostCategory, platform::LogLevel::Error, kModule, why + "; clients wait until there is room");
+  }
+  host_.loop.queue()->asyncAfter(kAcceptPause, [weak = weak_from_this()] {
+    if (const auto self = weak.lock()) {
+      self->startAccepting();
+    }
+  });
+}
+
+void SocketListener::take(UniqueDescriptor client) {
+  if (std::exchange(shortage_, false)) {
+    hostLog(host_.log, kHostCategory, platform::LogLevel::Default, kModule, "accepting clients again");
+  }
+  const auto delegate = delegate_.lock();
+  if (delegate == nullptr) {
+    return;
+  }
+  delegate->listenerShouldAcceptNewConnection(
+      std::make_shared<SocketConnection>(host_, std::move(client), nextNumber_++));
+}
+
+}  // namespace tarn::linux_host

@@ -1,0 +1,180 @@
+#include "host/traces/TraceRecording.h"
+
+#include <unistd.h>
+
+#include <cerrno>
+#include <ctime>
+#include <utility>
+
+#include "host/log/HostLog.h"
+
+namespace tarn::linux_host {
+
+using platform::LogLevel;
+using platform::MaybeError;
+using platform::PlatformError;
+
+namespace {
+
+constexpr std::string_view kModule = "PerformanceTrace";
+constexpr std::string_view kFolder = "/Audio/Traces";
+constexpr std::uint32_t kFolderPermissions = 0777;
+
+// "20261120-211717Z-tarnkit-PROCESS-NUMBER.json": no two traces of a device have the same.
+std::string fileName(double epochSeconds, std::uint64_t number) {
+  const auto seconds = static_cast<std::time_t>(epochSeconds);
+  std::tm calendar{};
+  ::gmtime_r(&seconds, &calendar);
+  char time[32];
+  const std::size_t length = std::strftime(time, sizeof time, "%Y%m%d-%H%M%SZ", &calendar);
+  return std::string(time, length) + "-tarnkit-" + std::to_string(::getpid()) + "-" + std::to_string(number) + ".json";
+}
+
+}  // namespace
+
+TraceRecording::TraceRecording(const TraceParts& parts, const PerformanceTraceLimits& limits,
+                               std::int32_t templateNumber, std::uint64_t number)
+    : parts_(parts),
+      limits_(limits),
+      templateNumber_(templateNumber),
+      number_(number),
+      token_("trace-" + std::to_string(number)) {}
+
+void TraceRecording::setDelegate(std::weak_ptr<platform::PerformanceTraceDelegate> delegate) {
+  const std::lock_guard lock(mutex_);
+  delegate_ = std::move(delegate);
+}
+
+bool TraceRecording::isValid() const {
+  const std::lock_guard lock(mutex_);
+  return state_ == State::Valid;
+}
+
+bool TraceRecording::askForStart() {
+  const std::lock_guard lock(mutex_);
+  if (state_ != State::New) return false;
+  state_ = State::Valid;
+  return true;
+}
+
+bool TraceRecording::askForStop() {
+  const std::lock_guard lock(mutex_);
+  if (state_ != State::Valid) return false;
+  state_ = State::Over;
+  return true;
+}
+
+void TraceRecording::release() noexcept {
+  {
+    const std::lock_guard lock(mutex_);
+    released_ = true;
+    state_ = State::Over;
+  }
+  endRecording();
+}
+
+void TraceRecording::start(bool hasRoom, std::function<void()> wake) {
+  MaybeError error;
+  if (!hasRoom) {
+    error = PlatformError{EBUSY, "as many traces as may be record already"};
+  } else {
+    error = openFile();
+  }
+  if (error) {
+    file_.reset();
+    const std::lock_guard lock(mutex_);
+    state_ = State::Over;
+  } else if (!beginRecording(std::move(wake))) {
+    file_.reset();
+    return;
+  }
+  tell([&](auto& delegate) { delegate.performanceTraceDidStart(error); });
+}
+
+void TraceRecording::drain() {
+  std::shared_ptr<SignpostBuffer> buffer;
+  {
+    const std::lock_guard lock(mutex_);
+    buffer = buffer_;
+  }
+  if (!isOpen() || buffer == nullptr || failure_) return;
+  SignpostBuffer::Content content = buffer->drain(std::move(spare_));
+  for (const SignpostRecord& record : content.records) {
+    file_->write(record);
+  }
+  if (content.lost > 0) file_->writeLost(content.lost, parts_.clock.monotonic());
+  if (templateNumber_ == kTemplateOfProfiles) sampleLoad();
+  spare_ = std::move(content.records);
+  failure_ = file_->flush();
+  if (failure_) {
+    endRecording();
+    hostLog(parts_.log, kTraceCategory, LogLevel::Error, kModule,
+            "performance trace " + token_ + " can't be written and ends here: " + failure_->text);
+  }
+}
+
+void TraceRecording::stop() {
+  if (!isOpen()) return;  // the start failed, and its callback was the last
+  endRecording();
+  drain();
+  tell([](auto& delegate) { delegate.performanceTraceDidStop({}); });
+  platform::Outcome<std::string> path{{}, failure_};
+  if (!failure_) {
+    path = file_->finish();
+    logLeftOut();
+  }
+  file_.reset();
+  tell([&](auto& delegate) { delegate.performanceTraceDidComplete(path.value, token_, path.error); });
+}
+
+MaybeError TraceRecording::openFile() {
+  const std::string directory =
+      parts_.fileSystem.wellKnownDirectory(platform::WellKnownDirectory::DiagnosticLogs) + std::string(kFolder);
+  if (auto error = parts_.fileSystem.createDirectories(directory, kFolderPermissions)) return error;
+  const double now = parts_.clock.epochSeconds();
+  file_ = std::make_unique<TraceFile>(TraceFile::Facts{directory, fileName(now, number_), token_, templateNumber_,
+                                                       templateNumber_ == kTemplateOfProfiles, limits_.mostBytes, now});
+  return file_->open();
+}
+
+// Whether the session still wants it.
+bool TraceRecording::beginRecording(std::function<void()> wake) {
+  const std::lock_guard lock(mutex_);
+  if (released_) return false;
+  buffer_ = std::make_shared<SignpostBuffer>(limits_.mostBufferedEvents, parts_.clock.monotonic(), std::move(wake));
+  parts_.signposts.add(buffer_);  // locked: or a release right now would come before it
+  return true;
+}
+
+void TraceRecording::endRecording() noexcept {
+  const std::lock_guard lock(mutex_);
+  if (buffer_ != nullptr) parts_.signposts.remove(buffer_.get());
+}
+
+void TraceRecording::sampleLoad() {
+  const auto now = parts_.clock.monotonic();
+  file_->writeCounter("processor time", "microseconds", parts_.clock.processorTicks(), now);
+  if (const auto footprint = parts_.processFacts.physicalFootprint().bytes) {
+    file_->writeCounter("memory", "bytes", static_cast<std::int64_t>(*footprint), now);
+  }
+}
+
+void TraceRecording::logLeftOut() const {
+  if (file_->leftOut() == 0) return;
+  hostLog(parts_.log, kTraceCategory, LogLevel::Error, kModule,
+          "performance trace " + token_ + " left out " + std::to_string(file_->leftOut()) +
+              " events: " + (file_->isFull() ? "its file is full" : "they came faster than they could be written"));
+}
+
+// Without the lock while it runs: a callback may take the delegate away or let go of the session.
+template <class Call>
+void TraceRecording::tell(const Call& call) {
+  std::shared_ptr<platform::PerformanceTraceDelegate> delegate;
+  {
+    const std::lock_guard lock(mutex_);
+    if (!released_) delegate = delegate_.lock();
+  }
+  if (delegate != nullptr) call(*delegate);
+}
+
+}  // namespace tarn::linux_host

@@ -1,0 +1,105 @@
+// TraceRecording: one performance trace, from the start that is asked for to its file.
+//
+// Owner: its session and, while it has work, the traces' thread. Threads: what a session asks for, any; the work, the
+// traces' thread, on which the callbacks are made.
+#pragma once
+
+#include <chrono>
+#include <cstddef>
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <mutex>
+#include <string>
+#include <vector>
+
+#include "host/traces/LinuxSignposts.h"
+#include "host/traces/TraceFile.h"
+#include "platform/Clock.h"
+#include "platform/FileSystem.h"
+#include "platform/Log.h"
+#include "platform/PerformanceTraceService.h"
+#include "platform/ProcessFacts.h"
+
+namespace tarn::linux_host {
+
+struct PerformanceTraceLimits {
+  std::size_t mostBytes = std::size_t{64} << 20U;          // of a file; some 450,000 events
+  std::size_t mostBufferedEvents = std::size_t{1} << 15U;  // of a trace, about 100 bytes each
+  std::size_t mostTraces = 4;                              // that record at once
+  std::chrono::milliseconds drainInterval{100};            // how often buffers are emptied; sooner when half full
+};
+
+// What traces stand on; all of it outlives them.
+struct TraceParts {
+  LinuxSignposts& signposts;
+  platform::FileSystem& fileSystem;
+  const platform::Clock& clock;
+  const platform::ProcessFacts& processFacts;
+  platform::Log& log;
+};
+
+class TraceRecording {
+ public:
+  static constexpr std::int32_t kTemplateOfIntervals = 2;
+  static constexpr std::int32_t kTemplateOfProfiles = 3;
+
+  // `number` counts the traces of this process.
+  TraceRecording(const TraceParts& parts, const PerformanceTraceLimits& limits, std::int32_t templateNumber,
+                 std::uint64_t number);
+  TraceRecording(const TraceRecording&) = delete;
+  TraceRecording& operator=(const TraceRecording&) = delete;
+
+  // What a session asks for.
+  void setDelegate(std::weak_ptr<platform::PerformanceTraceDelegate> delegate);
+  bool isValid() const;
+  // Whether the start (the stop) is to be carried out: at most once each, a stop only of a valid trace.
+  bool askForStart();
+  bool askForStop();
+  // Records no more and begins no more callbacks.
+  void release() noexcept;
+
+  // The work. `wake` is called when the buffer should be emptied early.
+  void start(bool hasRoom, std::function<void()> wake);
+  void drain();
+  void stop();
+  // Removes an unfinished file.
+  void discard() noexcept { file_.reset(); }
+  // Whether there is a file to be filled.
+  bool isOpen() const noexcept { return file_ != nullptr; }
+
+ private:
+  enum class State {
+    New,
+    Valid,  // a start was asked for and has not failed
+    Over,
+  };
+
+  platform::MaybeError openFile();
+  bool beginRecording(std::function<void()> wake);
+  void endRecording() noexcept;
+  void sampleLoad();
+  void logLeftOut() const;
+  template <class Call>
+  void tell(const Call& call);
+
+  const TraceParts parts_;
+  const PerformanceTraceLimits limits_;
+  const std::int32_t templateNumber_;
+  const std::uint64_t number_;
+  const std::string token_;
+
+  // The traces' thread's own.
+  std::unique_ptr<TraceFile> file_;
+  std::vector<SignpostRecord> spare_;
+  platform::MaybeError failure_;  // of the disk
+
+  mutable std::mutex mutex_;
+  // Guarded by mutex_.
+  std::weak_ptr<platform::PerformanceTraceDelegate> delegate_;
+  std::shared_ptr<SignpostBuffer> buffer_;  // set once, when recording begins
+  State state_ = State::New;
+  bool released_ = false;
+};
+
+}  // namespace tarn::linux_host

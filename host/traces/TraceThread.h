@@ -1,0 +1,58 @@
+// TraceThread: does the work of all traces: carries out what sessions ask for, in their order, and empties the buffers
+// of those that record.
+//
+// Owner: the service of the traces, shared with its sessions. The thread exists from run() until end(). Threads: any.
+#pragma once
+
+#include <chrono>
+#include <condition_variable>
+#include <cstddef>
+#include <memory>
+#include <mutex>
+#include <thread>
+#include <vector>
+
+#include "host/traces/TraceRecording.h"
+
+namespace tarn::linux_host {
+
+class TraceThread {
+ public:
+  enum class Verb { Start, Stop, Release };
+
+  explicit TraceThread(const PerformanceTraceLimits& limits) : limits_(limits) {}
+  ~TraceThread() { end(); }
+  TraceThread(const TraceThread&) = delete;
+  TraceThread& operator=(const TraceThread&) = delete;
+
+  // Whether the thread runs; starts it when it doesn't yet.
+  [[nodiscard]] bool run();
+  // Has something done; nothing any more behind end().
+  void post(Verb verb, std::shared_ptr<TraceRecording> recording);
+  // Ends all traces without callbacks, and the thread.
+  void end();
+
+ private:
+  struct Command {
+    Verb verb;
+    std::shared_ptr<TraceRecording> recording;
+  };
+
+  void work();
+  void waitForWork(std::unique_lock<std::mutex>& lock);
+  void carryOut(const Command& command);
+  void wake();
+
+  const PerformanceTraceLimits limits_;
+  std::vector<std::shared_ptr<TraceRecording>> open_;  // the thread's own
+
+  std::mutex mutex_;
+  std::condition_variable changed_;
+  // Guarded by mutex_.
+  std::thread thread_;
+  std::vector<Command> commands_;
+  bool mustDrain_ = false;
+  bool ended_ = false;
+};
+
+}  // namespace tarn::linux_host

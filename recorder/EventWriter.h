@@ -1,0 +1,65 @@
+// EventWriter: writes batches of events into the recorder's file and copes with whatever happens to that file.
+//
+// Owner: the recorder. Threads: all calls on the recorder's writer thread.
+//
+// A passing fault (a full or read-only disk, an I/O error, a lock) is logged once when it begins and once when all
+// works again; nothing is dropped, the caller comes again later. A file that can't be used is set aside with an error
+// line and a fresh one is begun, into which goes what wasn't committed.
+#pragma once
+
+#include <chrono>
+#include <cstddef>
+#include <cstdint>
+#include <string>
+
+#include "platform/Clock.h"
+#include "platform/Log.h"
+#include "recorder/RecorderLog.h"
+#include "recorder/RecorderOptions.h"
+#include "recorder/store/EventBatch.h"
+#include "recorder/store/EventFile.h"
+
+namespace tarn::recorder {
+
+class EventWriter {
+ public:
+  EventWriter(const RecorderOptions& options, platform::Log& log, const platform::Clock& clock);
+  EventWriter(const EventWriter&) = delete;
+  EventWriter& operator=(const EventWriter&) = delete;
+
+  // Opens the file if it isn't open. False: a fault; come again later.
+  [[nodiscard]] bool open();
+  // Writes events from `from` on in one transaction: all of them, or as many as fit into the time and size of a commit.
+  // How many are now committed; 0 for a fault.
+  [[nodiscard]] std::size_t write(const EventBatch& batch, std::size_t from);
+  // What may wait until the commit is announced: the checkpoint, and the word that a fault is over.
+  [[nodiscard]] bool settle();
+  // One step of retention in a transaction of its own.
+  [[nodiscard]] bool maintain();
+  void close() noexcept { file_.close(); }
+
+  bool hasMoreToExpire() const noexcept { return file_.hasMoreToExpire(); }
+  std::uint64_t expired() const noexcept { return file_.expired(); }
+  const std::string& problem() const noexcept { return file_.problem(); }
+
+ private:
+  [[nodiscard]] Outcome openOnce();
+  [[nodiscard]] Outcome writeOnce(const EventBatch& batch, std::size_t from, std::size_t& written);
+  [[nodiscard]] Outcome maintainOnce();
+  // Does what the outcome asks for and logs it. Whether to try again at once.
+  [[nodiscard]] bool resolve(Outcome outcome);
+  void noteFault();
+  const std::string& payloadText(const plist::Dictionary& payload);
+
+  const RecorderOptions& options_;
+  const platform::Clock& clock_;
+  RecorderLog log_;
+  EventFile file_;
+  plist::Dictionary lastPayload_;  // whose text payloadText_ is
+  std::string payloadText_ = "{}";
+  std::string detailText_;
+  std::chrono::nanoseconds faultSince_{0};
+  bool faulty_ = false;
+};
+
+}  // namespace tarn::recorder

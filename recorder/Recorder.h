@@ -1,0 +1,119 @@
+// Recorder: stands in for the device's back-end services. What they would have received goes into one SQLite database,
+// events(id, time, backend, name, payload, detail), readable while it is written.
+//
+// Owner: the entry point. start() makes the writer thread, shutdown() ends it; in between nothing that was handed over
+// is lost. Events are committed in groups, at most 200 ms after their hand-over while the disk is well.
+//
+// record() takes a short lock and counts references: no text is formed, no system call is made while a commit is being
+// gathered. It never drops an event and never waits for the disk; so that what waits stays bounded, whoever takes
+// events in from outside stops doing so while isFull() is true and goes on when the room handler is called.
+#pragma once
+
+#include <atomic>
+#include <chrono>
+#include <condition_variable>
+#include <cstddef>
+#include <cstdint>
+#include <mutex>
+#include <string_view>
+#include <thread>
+#include <utility>
+
+#include "platform/Clock.h"
+#include "platform/Log.h"
+#include "platform/UniqueFunction.h"
+#include "plist/Dictionary.h"
+#include "recorder/EventWriter.h"
+#include "recorder/RecorderOptions.h"
+#include "recorder/store/EventBatch.h"
+
+namespace tarn::recorder {
+
+// Events since the start. At any moment handedOver = committed + waiting + failed.
+struct RecorderCounters {
+  std::uint64_t handedOver = 0;
+  std::uint64_t committed = 0;
+  std::uint64_t waiting = 0;
+  std::uint64_t expired = 0;  // removed by retention
+  std::uint64_t failed = 0;   // given up at a shutdown, by a disk that never came back
+};
+
+class Recorder {
+ public:
+  using RoomHandler = platform::UniqueFunction<void()>;
+
+  Recorder(RecorderOptions options, platform::Log& log, const platform::Clock& clock);
+  ~Recorder();
+  Recorder(const Recorder&) = delete;
+  Recorder& operator=(const Recorder&) = delete;
+
+  // Called on the writer thread each time isFull() has become false again. Set before start().
+  void setRoomHandler(RoomHandler handler) { roomHandler_ = std::move(handler); }
+  void start();
+  // Waits, once started, until the first attempt to open the file is over, which takes longest with a large file, as it
+  // is read through.
+  void waitUntilOpened();
+  // Commits what waits and closes the file, refusing what is handed over from now on; a disk that fails gets a few last
+  // tries, then what waits counts as failed. Called once, on the thread that called start(); the destructor does it
+  // otherwise.
+  void shutdown();
+
+  // Hands an event over, before start() too; `backend` must be a text that lives for ever, `time` is in epoch seconds.
+  // Behind shutdown() the event counts as failed. Threads: any.
+  void record(std::string_view backend, std::string_view name, plist::Dictionary payload, plist::Dictionary detail,
+              double time);
+  // Whether events should not be brought in for now. Threads: any.
+  bool isFull() const noexcept { return full_.load(std::memory_order_relaxed); }
+  // All counters of one moment. Threads: any.
+  RecorderCounters counters() const;
+  // Commits what was handed over before the call without waiting for company. Whether all of it is committed; false
+  // when the time is up or when it was given up. Threads: any but the writer's.
+  [[nodiscard]] bool flush(std::chrono::milliseconds timeout);
+
+ private:
+  using Lock = std::unique_lock<std::mutex>;
+  using TimePoint = std::chrono::steady_clock::time_point;
+
+  void run();
+  void waitForWork(Lock& lock);
+  void gather(Lock& lock);
+  void waitForRetry(Lock& lock);
+  bool writeCurrent(Lock& lock);
+  bool maintain(Lock& lock);
+  void account(Lock& lock, std::size_t events, std::size_t bytes);
+  void giveUp(Lock& lock);
+  bool hasWaiting() const noexcept { return committed_ + failed_ != handedOver_; }
+
+  const RecorderOptions options_;
+  RecorderLog log_;
+  RoomHandler roomHandler_;
+  std::thread thread_;
+
+  // The writer thread's own.
+  EventWriter writer_;
+  EventBatch current_;
+  std::size_t position_ = 0;  // in current_: what stands before it is committed
+  std::chrono::milliseconds retry_;
+  TimePoint nextMaintenance_;
+
+  std::atomic<bool> full_{false};
+  mutable std::mutex mutex_;
+  std::condition_variable work_;  // for the writer thread
+  std::condition_variable done_;  // for those who wait for it
+  // Guarded by mutex_.
+  EventBatch incoming_;
+  TimePoint incomingSince_;
+  std::size_t waitingBytes_ = 0;
+  std::uint64_t handedOver_ = 0;
+  std::uint64_t committed_ = 0;
+  std::uint64_t failed_ = 0;
+  std::uint64_t expired_ = 0;
+  int flushers_ = 0;
+  bool asleep_ = false;  // the writer waits for the first event of a group
+  bool opened_ = false;
+  bool stopping_ = false;
+  bool refusing_ = false;
+  bool refusalLogged_ = false;
+};
+
+}  // namespace tarn::recorder

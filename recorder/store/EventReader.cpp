@@ -1,0 +1,198 @@
+#include "recorder/store/EventReader.h"
+
+#include <sqlite3.h>
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <thread>
+#include <utility>
+
+#include "recorder/store/GlobPattern.h"
+#include "recorder/store/Statement.h"
+
+namespace tarn::recorder {
+
+namespace {
+
+constexpr int kBusyMilliseconds = 2000;
+// The pace of looking for changes: quick behind a change, gentle when it stays quiet.
+constexpr std::chrono::milliseconds kFirstLook{10};
+constexpr std::chrono::milliseconds kLastLook{200};
+
+std::string_view valueText(sqlite3_value* value) noexcept {
+  const void* const bytes = sqlite3_value_blob(value);
+  const auto size = static_cast<std::size_t>(sqlite3_value_bytes(value));
+  return bytes == nullptr ? std::string_view() : std::string_view(static_cast<const char*>(bytes), size);
+}
+
+void matchesGlob(sqlite3_context* context, int, sqlite3_value** values) {
+  sqlite3_result_int(context, globMatches(valueText(values[0]), valueText(values[1])) ? 1 : 0);
+}
+
+// The file name as a "file:" URI, in which some characters would mean something.
+std::string uriOf(const std::string& path) {
+  std::string uri = "file:";
+  for (const char c : path) {
+    if (c == '%' || c == '?' || c == '#') {
+      constexpr const char* kDigits = "0123456789abcdef";
+      const auto byte = static_cast<unsigned char>(c);
+      uri.append({'%', kDigits[byte >> 4], kDigits[byte & 15]});
+    } else {
+      uri.push_back(c);
+    }
+  }
+  return uri + "?mode=ro&immutable=1";
+}
+
+EventReader::Result missing(std::string error) {
+  EventReader::Result result;
+  result.status = EventReader::Status::Missing;
+  result.error = std::move(error);
+  return result;
+}
+
+EventReader::Result failed(std::string error) {
+  EventReader::Result result;
+  result.status = EventReader::Status::Failed;
+  result.error = std::move(error);
+  return result;
+}
+
+}  // namespace
+
+EventReader::EventReader(std::filesystem::path file) : file_(std::move(file)) {}
+
+EventReader::Identity EventReader::identity() const {
+  struct stat status {};
+  if (::stat(file_.c_str(), &status) != 0) return {};
+  struct stat log {};
+  Identity now;
+  now.there = true;
+  now.device = static_cast<std::uint64_t>(status.st_dev);
+  now.inode = static_cast<std::uint64_t>(status.st_ino);
+  now.size = status.st_size;
+  now.modified = std::int64_t{status.st_mtim.tv_sec} * 1'000'000'000 + status.st_mtim.tv_nsec;
+  now.hasLog = ::stat((file_.string() + "-wal").c_str(), &log) == 0;
+  return now;
+}
+
+bool EventReader::sameFile(const Identity& now) const noexcept {
+  if (asItLies_) return now == opened_;
+  return now.there == opened_.there && now.device == opened_.device && now.inode == opened_.inode;
+}
+
+bool EventReader::openAs(const std::string& name, std::string& error) {
+  if (connection_.open(name, SQLITE_OPEN_READONLY | SQLITE_OPEN_URI) != SQLITE_OK) {
+    error = connection_.errorText();
+    return false;
+  }
+  sqlite3_busy_timeout(connection_.handle(), kBusyMilliseconds);
+  sqlite3_create_function_v2(connection_.handle(), "matches_glob", 2, SQLITE_UTF8 | SQLITE_DETERMINISTIC, nullptr,
+                             matchesGlob, nullptr, nullptr, nullptr);
+  // Only the first reading access shows whether the log and its index can be used.
+  if (!connection_.integer("SELECT count(*) FROM sqlite_schema")) {
+    error = connection_.errorText();
+    return false;
+  }
+  return true;
+}
+
+bool EventReader::open(std::string& error) {
+  opened_ = identity();
+  asItLies_ = false;
+  dataVersion_ = -1;
+  if (openAs(file_.string(), error)) return true;
+  const int code = sqlite3_errcode(connection_.handle()) & 0xFF;
+  // No index can be made in a directory that can't be written to. Where there is no log either, nobody writes, and the
+  // file alone is all there is.
+  if ((code == SQLITE_CANTOPEN || code == SQLITE_READONLY) && !opened_.hasLog) {
+    asItLies_ = true;
+    if (openAs(uriOf(file_.string()), error)) return true;
+  }
+  connection_.close();
+  return false;
+}
+
+EventReader::Result EventReader::read(const EventQuery& query) {
+  const Identity now = identity();
+  if (!now.there) {
+    connection_.close();
+    if (lastRead_) lastRead_ = Identity();  // whatever comes next is another file, even where it gets the same number
+    return missing("there is no file " + file_.string());
+  }
+  if (connection_.isOpen() && !sameFile(now)) connection_.close();
+  std::string error;
+  if (!connection_.isOpen() && !open(error)) return failed(file_.string() + ": " + error);
+  Result result = readOpen(query);
+  if (result.status == Status::Failed) connection_.close();
+  return result;
+}
+
+// In another file than the one before everything is new that doesn't carry on its ids.
+std::int64_t EventReader::startingPoint(std::int64_t after) {
+  if (!lastRead_ || (lastRead_->device == opened_.device && lastRead_->inode == opened_.inode)) return after;
+  const auto begun = connection_.integer("SELECT value FROM recorder_state WHERE name = 'begun_after'");
+  return std::min(after, begun.value_or(0));
+}
+
+EventReader::Result EventReader::readOpen(const EventQuery& query) {
+  Result result;
+  dataVersion_ = connection_.integer("PRAGMA data_version").value_or(-1);
+  if (connection_.run("BEGIN") != SQLITE_OK) return failed(file_.string() + ": " + connection_.errorText());
+  std::int64_t after = query.after;
+  const auto tables = connection_.integer("SELECT count(*) FROM sqlite_schema WHERE name = 'events'");
+  if (tables == 0) {
+    static_cast<void>(connection_.run("ROLLBACK"));
+    return missing(file_.string() + " holds no events yet");
+  }
+  after = startingPoint(after);
+  const bool ok = readRows(query, after, result);
+  std::string error = ok ? std::string() : connection_.errorText();
+  static_cast<void>(connection_.run("ROLLBACK"));
+  if (!ok) return failed(file_.string() + ": " + error);
+  lastRead_ = opened_;
+  return result;
+}
+
+bool EventReader::readRows(const EventQuery& query, std::int64_t after, Result& result) {
+  std::string sql = "SELECT id, time, backend, name, payload, detail FROM events WHERE id > ?1";
+  if (query.backend) sql += " AND backend = ?2";
+  if (query.nameGlob) sql += " AND matches_glob(?3, name)";
+  sql += " ORDER BY id LIMIT ?4";
+  Statement rows;
+  if (rows.prepare(connection_.handle(), sql) != SQLITE_OK) return false;
+  rows.bind(1, after).bind(4, static_cast<std::int64_t>(query.limit));
+  if (query.backend) rows.bind(2, std::string_view(*query.backend));
+  if (query.nameGlob) rows.bind(3, std::string_view(*query.nameGlob));
+  int code = rows.step();
+  for (; code == SQLITE_ROW; code = rows.step()) {
+    result.rows.push_back({rows.integer(0), rows.real(1), std::string(rows.text(2)), std::string(rows.text(3)),
+                           std::string(rows.text(4)), std::string(rows.text(5))});
+  }
+  if (code != SQLITE_DONE) return false;
+  result.more = result.rows.size() == query.limit;
+  const std::int64_t last = connection_.integer("SELECT max(id) FROM events").value_or(after);
+  result.lookedUpTo = result.more && !result.rows.empty() ? result.rows.back().id : std::max(after, last);
+  return true;
+}
+
+bool EventReader::changed() {
+  const Identity now = identity();
+  if (!connection_.isOpen()) return now.there;
+  if (!sameFile(now)) return now.there;
+  if (asItLies_) return false;
+  const auto version = connection_.integer("PRAGMA data_version");
+  return !version || *version != dataVersion_;
+}
+
+bool EventReader::waitForChange(std::chrono::milliseconds timeout) {
+  const auto until = std::chrono::steady_clock::now() + timeout;
+  for (auto pause = kFirstLook;; pause = std::min(pause * 2, kLastLook)) {
+    if (changed()) return true;
+    const auto left = std::chrono::ceil<std::chrono::milliseconds>(until - std::chrono::steady_clock::now());
+    if (left <= std::chrono::milliseconds(0)) return false;
+    std::this_thread::sleep_for(std::min(pause, left));
+  }
+}
+
+}  // namespace tarn::recorder

@@ -1,0 +1,89 @@
+// EventReader: reads what the recorder holds, while it is being written or when no service runs.
+//
+// Owner: a tool. Opens the file read-only and keeps no transaction open between two calls. A file in a directory that
+// can't be written to is read as it lies there when nobody else has it open. When the file is set aside or replaced,
+// the reader goes on with the new one. Threads: one at a time.
+#pragma once
+
+#include <chrono>
+#include <cstddef>
+#include <cstdint>
+#include <filesystem>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "recorder/store/Connection.h"
+
+namespace tarn::recorder {
+
+struct EventRow {
+  std::int64_t id = 0;
+  double time = 0;  // epoch seconds
+  std::string backend;
+  std::string name;
+  std::string payload;  // JSON
+  std::string detail;   // JSON
+};
+
+struct EventQuery {
+  std::optional<std::string> backend;
+  std::optional<std::string> nameGlob;  // see globMatches
+  std::int64_t after = 0;               // events with greater ids
+  std::size_t limit = 1000;
+};
+
+class EventReader {
+ public:
+  enum class Status : std::uint8_t {
+    Ok,
+    Missing,  // there is no file, or none with events in it yet
+    Failed,
+  };
+  struct Result {
+    Status status = Status::Ok;
+    std::vector<EventRow> rows;  // by ascending id
+    // Where the next query goes on: the id up to which events were looked at. Less than the query's `after` when the
+    // file was replaced by one whose ids begin anew; its rows are then in this result.
+    std::int64_t lookedUpTo = 0;
+    bool more = false;  // the limit cut the result short
+    std::string error;  // when not Ok
+  };
+
+  explicit EventReader(std::filesystem::path file);
+  EventReader(const EventReader&) = delete;
+  EventReader& operator=(const EventReader&) = delete;
+
+  Result read(const EventQuery& query);
+  // Waits until something was written since the last read, or until the time is up; whether there is reason to read.
+  bool waitForChange(std::chrono::milliseconds timeout);
+
+ private:
+  struct Identity {
+    bool there = false;
+    std::uint64_t device = 0;
+    std::uint64_t inode = 0;
+    std::int64_t size = 0;  // of a file read as it lies there: any change means another content
+    std::int64_t modified = 0;
+    bool hasLog = false;
+    friend bool operator==(const Identity&, const Identity&) = default;
+  };
+
+  Identity identity() const;
+  bool sameFile(const Identity& now) const noexcept;
+  bool changed();
+  bool open(std::string& error);
+  bool openAs(const std::string& name, std::string& error);
+  std::int64_t startingPoint(std::int64_t after);
+  Result readOpen(const EventQuery& query);
+  bool readRows(const EventQuery& query, std::int64_t after, Result& result);
+
+  const std::filesystem::path file_;
+  Connection connection_;
+  Identity opened_;
+  bool asItLies_ = false;             // opened without locks and log
+  std::optional<Identity> lastRead_;  // the file of the last rows, nothing before the first ones
+  std::int64_t dataVersion_ = -1;
+};
+
+}  // namespace tarn::recorder

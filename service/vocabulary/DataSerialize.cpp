@@ -1,0 +1,205 @@
+#include "service/vocabulary/DataSerialize.h"
+
+#include <algorithm>
+#include <chrono>
+#include <cmath>
+#include <cstdio>
+#include <string_view>
+
+#include "plist/Characters.h"
+#include "plist/Dictionary.h"
+#include "plist/formats/Json.h"
+
+namespace tarn {
+
+namespace {
+
+constexpr std::string_view kOpening = "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist version=\"1.0\">\n";
+constexpr std::string_view kClosing = "</plist>\n";
+
+bool isXmlText(std::string_view text) {
+  while (!text.empty()) {
+    const auto character = plist::takeCharacter(text);
+    if (!character || !plist::isXmlCharacter(*character)) {
+      return false;
+    }
+  }
+  return true;
+}
+
+// Writes one value; every operation says whether the value can be held by a property list.
+class XmlWriter {
+ public:
+  explicit XmlWriter(std::string& out) : out_(out) {}
+
+  bool write(const plist::ValueView& value, std::size_t depth) {
+    indent(depth);
+    switch (value.kind()) {
+      case plist::Kind::None:
+        return false;
+      case plist::Kind::Bool:
+        out_ += value.boolValue() ? "<true/>\n" : "<false/>\n";
+        return true;
+      case plist::Kind::Signed:
+      case plist::Kind::Unsigned:
+        return element("integer", plist::description(value));
+      case plist::Kind::Float:
+      case plist::Kind::Double:
+        return element("real", realText(value));
+      case plist::Kind::Date:
+        return writeDate(value.dateValue());
+      case plist::Kind::Text:
+        return element("string", value.text());
+      case plist::Kind::Data:
+        return writeData(value.data());
+      case plist::Kind::Array:
+        return writeArray(value.array(), depth);
+      case plist::Kind::Dictionary:
+        return writeDictionary(value.dictionary(), depth);
+    }
+    return false;
+  }
+
+ private:
+  void indent(std::size_t depth) { out_.append(depth, '\t'); }
+
+  bool element(std::string_view name, std::string_view text) {
+    if (!isXmlText(text)) {
+      return false;
+    }
+    out_.append("<").append(name).append(">");
+    for (const char character : text) {
+      appendEscaped(character);
+    }
+    out_.append("</").append(name).append(">\n");
+    return true;
+  }
+
+  void appendEscaped(char character) {
+    switch (character) {
+      case '&':
+        out_ += "&amp;";
+        break;
+      case '<':
+        out_ += "&lt;";
+        break;
+      case '>':
+        out_ += "&gt;";
+        break;
+      case '\r':
+        out_ += "&#13;";  // a bare one would be read back as a line feed
+        break;
+      default:
+        out_ += character;
+    }
+  }
+
+  static std::string realText(const plist::ValueView& value) {
+    const double number = value.asDouble();
+    if (std::isnan(number)) {
+      return "nan";
+    }
+    if (std::isinf(number)) {
+      return number > 0 ? "+infinity" : "-infinity";
+    }
+    return plist::description(value);
+  }
+
+  bool writeDate(plist::Date date) {
+    using namespace std::chrono;
+    constexpr double kYear1 = -62135596800.0;
+    constexpr double kYear10000 = 253402300800.0;
+    if (!(date.epochSeconds >= kYear1 && date.epochSeconds < kYear10000)) {
+      return false;
+    }
+    const sys_seconds moment{seconds(static_cast<std::int64_t>(std::floor(date.epochSeconds)))};
+    const sys_days day = floor<days>(moment);
+    const year_month_day calendar{day};
+    const hh_mm_ss time{moment - day};
+    char text[40];
+    static_cast<void>(std::snprintf(text, sizeof text, "%04d-%02u-%02uT%02d:%02d:%02dZ",
+                                    static_cast<int>(calendar.year()), static_cast<unsigned>(calendar.month()),
+                                    static_cast<unsigned>(calendar.day()), static_cast<int>(time.hours().count()),
+                                    static_cast<int>(time.minutes().count()),
+                                    static_cast<int>(time.seconds().count())));
+    return element("date", text);
+  }
+
+  bool writeData(std::string_view bytes) {
+    out_ += "<data>";
+    plist::appendBase64(out_, bytes);
+    out_ += "</data>\n";
+    return true;
+  }
+
+  bool writeArray(const plist::Array& array, std::size_t depth) {
+    if (array.empty()) {
+      out_ += "<array/>\n";
+      return true;
+    }
+    out_ += "<array>\n";
+    for (const plist::ValueView item : array) {
+      if (!write(item, depth + 1)) {
+        return false;
+      }
+    }
+    indent(depth);
+    out_ += "</array>\n";
+    return true;
+  }
+
+  bool writeDictionary(const plist::Dictionary& dictionary, std::size_t depth) {
+    if (dictionary.empty()) {
+      out_ += "<dict/>\n";
+      return true;
+    }
+    out_ += "<dict>\n";
+    for (const auto& [key, value] : dictionary) {
+      indent(depth + 1);
+      if (!element("key", key.text()) || !write(value, depth + 1)) {
+        return false;
+      }
+    }
+    indent(depth);
+    out_ += "</dict>\n";
+    return true;
+  }
+
+  std::string& out_;
+};
+
+}  // namespace
+
+std::optional<std::string> DataSerialize::getPlistBlob(const plist::ValueView& value) {
+  std::string xml(kOpening);
+  if (!XmlWriter(xml).write(value, 0)) {
+    return std::nullopt;
+  }
+  xml += kClosing;
+  return xml;
+}
+
+std::optional<std::string> DataSerialize::getXMLInfo(const plist::ValueView& value) {
+  auto xml = getPlistBlob(value);
+  const auto isAscii = [](char character) { return static_cast<unsigned char>(character) < 0x80; };
+  if (xml && !std::all_of(xml->begin(), xml->end(), isAscii)) {
+    return std::nullopt;
+  }
+  return xml;
+}
+
+std::optional<std::string> DataSerialize::getDataXMLInfo(const plist::ValueView& value) {
+  return getPlistBlob(value);
+}
+
+std::optional<std::string> DataSerialize::getBase64XMLBlob(const plist::ValueView& value) {
+  const auto xml = getPlistBlob(value);
+  if (!xml) {
+    return std::nullopt;
+  }
+  std::string base64;
+  plist::appendBase64(base64, *xml);
+  return base64;
+}
+
+}  // namespace tarn

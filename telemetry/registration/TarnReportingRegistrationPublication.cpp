@@ -1,0 +1,105 @@
+#include "telemetry/registration/TarnReportingRegistrationPublication.h"
+
+#include <cstdint>
+#include <optional>
+#include <string_view>
+#include <utility>
+
+#include "platform/Clock.h"
+#include "platform/Facilities.h"
+#include "platform/RtcReportingService.h"
+#include "service/vocabulary/TarnReportingLog.h"
+#include "service/vocabulary/TarnReportingPlatform.h"
+#include "session/TarnReportingSession.h"
+#include "session/TarnReportingSessionKeys.h"
+#include "session/TarnReportingSessionMessage.h"
+#include "telemetry/registration/TarnReportingRegistrationState.h"
+
+namespace tarn {
+
+namespace {
+
+constexpr std::string_view kModule = "TarnReportingRegistrationPublication";
+constexpr int kClientType = 52;
+constexpr float kClientVersion = 2.1F;
+constexpr double kWeekSeconds = 604800;
+
+using InfoKeys = platform::RtcSessionInfoKeys;
+using UserKeys = platform::RtcUserInfoKeys;
+
+plist::Dictionary sessionInfoOf(const TarnReportingSession& session, const std::string& hierarchyToken) {
+  plist::Dictionary info{{InfoKeys::kClientType, kClientType},
+                         {InfoKeys::kClientVersion, kClientVersion},
+                         {InfoKeys::kSessionID, session.reporterID()},
+                         {InfoKeys::kBatchEvent, false},
+                         {InfoKeys::kHierarchyToken, hierarchyToken}};
+  if (const plist::ValueView application = session.configuration().get(keys::kHostApplicationDisplayID)) {
+    info.set(InfoKeys::kClientBundleID, application);
+  }
+  return info;
+}
+
+plist::Dictionary userInfoOf(const TarnReportingSession& session) {
+  plist::Dictionary info{{UserKeys::kClientName, "Tessels_Telemetry"},
+                         {UserKeys::kServiceName, "Tessels_Registration"}};
+  info.merge(session.configuration());
+  return info;
+}
+
+// The category proper, without its domain.
+std::uint16_t backendCategory(AudioEventCategory category) {
+  return static_cast<std::uint16_t>(category);
+}
+
+}  // namespace
+
+TarnReportingRegistrationPublication::TarnReportingRegistrationPublication(
+    std::shared_ptr<TarnReportingRegistrationState> state, std::vector<plist::Dictionary> records)
+    : state_(std::move(state)), records_(std::move(records)) {}
+
+TarnReportingRegistrationPublication::~TarnReportingRegistrationPublication() = default;
+
+void TarnReportingRegistrationPublication::begin(const TarnReportingSession& session,
+                                                 const std::string& hierarchyToken) {
+  rtcReportingSession_ = TarnReportingFacilities().rtcReporting->createSession(sessionInfoOf(session, hierarchyToken),
+                                                                               userInfoOf(session), std::nullopt);
+  if (!rtcReportingSession_) {
+    return;
+  }
+  rtcReportingSession_->startConfiguration(
+      [self = shared_from_this()](const std::optional<std::vector<std::string>>& backends) {
+        self->started_ = backends.has_value();
+        if (backends) {
+          self->sendRecords();
+        } else {
+          TarnReportingLog(TarnReportingAudioRegistrationCategory(), LogLevel::Error, kModule,
+                           "no backends found, this session won't get sent to the server");
+        }
+      });
+}
+
+void TarnReportingRegistrationPublication::sendRecords() {
+  for (const plist::Dictionary& record : records_) {
+    sendMessage(TarnReportingSessionMessage(record, AudioEventCategory::Tessels, AudioEventType::Summary));
+  }
+  TarnReportingLog(TarnReportingAudioRegistrationCategory(), LogLevel::Debug, kModule, "Message Sent->");
+}
+
+void TarnReportingRegistrationPublication::sendMessage(const TarnReportingSessionMessage& message) {
+  const platform::RtcReportingSession::SendResult result = rtcReportingSession_->sendMessage(
+      backendCategory(message.category()), static_cast<std::uint16_t>(message.type()), message.message());
+  if (!result.sent) {
+    if (result.error) {
+      TarnReportingLog(TarnReportingAudioRegistrationCategory(), LogLevel::Error, kModule, "error sending message %@",
+                       result.error->text);
+    }
+    return;
+  }
+  TarnReportingLog(TarnReportingAudioRegistrationCategory(), LogLevel::Default, kModule,
+                   "RTCReportingAgent %@ : message %@ : category %i : type %i", rtcReportingSession_->description(),
+                   message.message(), static_cast<std::uint32_t>(message.category()),
+                   static_cast<std::uint16_t>(message.type()));
+  state_->scheduleNextInvocation(TarnReportingFacilities().clock.epochSeconds() + kWeekSeconds);
+}
+
+}  // namespace tarn

@@ -1,0 +1,62 @@
+// TarnReportingSessionAudioRegistrationWorker: reports about once a week which wireless earbuds were connected lately,
+// a record for each accessory, to the real-time-communication reporting service.
+//
+// A message that names the earbuds among the active devices makes it enumerate the accessories, at most once a minute.
+// At stop it decides whether a publication is due. The first one of a device is put off by a random part of a week, so
+// that many devices spread theirs.
+//
+// Switched off: initWithSession yields no worker. Whoever switches it on makes one with the public constructor.
+//
+// Owner: the session. Threads: the server queue; the back-end's completion comes on a thread of its own, at any time.
+#pragma once
+
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "plist/Dictionary.h"
+#include "service/vocabulary/TarnReportingVocabulary.h"
+#include "session/TarnReportingSessionWorker.h"
+
+namespace tarn {
+
+class TarnReportingRegistrationPublication;
+class TarnReportingRegistrationState;
+
+class TarnReportingSessionAudioRegistrationWorker : public TarnReportingSessionWorkerProtocol,
+                                                    public TarnReportingSessionWorkerConsumerProtocol {
+ public:
+  static constexpr std::string_view kClassName = "TarnReportingSessionAudioRegistrationWorker";
+
+  // Nothing, for every session.
+  static std::unique_ptr<TarnReportingSessionAudioRegistrationWorker> initWithSession(
+      const std::shared_ptr<TarnReportingSession>& session);
+  TarnReportingSessionAudioRegistrationWorker(std::weak_ptr<TarnReportingSession> session,
+                                              std::shared_ptr<TarnReportingRegistrationState> state);
+  ~TarnReportingSessionAudioRegistrationWorker() override;
+
+  bool start();
+  void stop();
+  void handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) override;
+
+  // Whether the last publication found backends.
+  bool rtcReportingSessionStarted() const noexcept;
+
+  // The work week (1 to 53) of a moment in the device's time zone. The number counts as whole seconds since 1970 of 32
+  // bits without a sign; larger ones wrap.
+  static int convertEpochToWorkWeek(const plist::ValueView& epoch);
+
+ private:
+  void enumerate();
+  void publish(double now);
+  std::vector<plist::Dictionary> recentRecords(double now) const;
+  void setupRTCReporterInterface(std::vector<plist::Dictionary> records);
+
+  const std::shared_ptr<TarnReportingRegistrationState> state_;
+  // The last one; kept, since letting go of a back-end session ends it.
+  std::shared_ptr<TarnReportingRegistrationPublication> publication_;
+};
+
+}  // namespace tarn

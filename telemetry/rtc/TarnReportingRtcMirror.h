@@ -1,0 +1,96 @@
+// TarnReportingRtcMirror: the session that an Rtc worker holds in the real-time-communication reporting service, and
+// all that is done to it.
+//
+//   server queue        private queue                          a thread of the service
+//   start       ------> token, session, start configuration --> completion: flags, signal
+//   messages    ------> (suspended: signal or 9 seconds) <-----'
+//   stop        ------> each sent, or dropped when nothing answered; then summary, flush, end
+//
+// Shared by the worker, its tasks and the completion, so that each may come when the others are gone: a worker that is
+// released without a stop leaves what it handed over to be sent.
+//
+// Threads: rtcReportingQueue() the server queue (its first call comes before any task); the flags any; all else the
+// private queue.
+#pragma once
+
+#include <atomic>
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "platform/RtcReportingService.h"
+#include "platform/WorkQueue.h"
+#include "plist/Dictionary.h"
+#include "service/vocabulary/TarnReportingVocabulary.h"
+#include "session/TarnReportingSessionMessage.h"
+#include "telemetry/rtc/TarnReportingQueueSemaphore.h"
+
+namespace tarn {
+
+class TarnReportingRtcMirror : public std::enable_shared_from_this<TarnReportingRtcMirror> {
+ public:
+  using MessagePointer = std::shared_ptr<TarnReportingSessionMessage>;
+
+  // The session as it was when it was started.
+  struct Started {
+    plist::Dictionary configuration;
+    std::string serviceName;  // with its suffix
+    AudioServiceType serviceType;
+    std::int64_t reporterID;
+    bool isSingleMessageSession;
+  };
+  // The session as it was when it was stopped.
+  struct Stopped {
+    std::vector<MessagePointer> messages;  // copies of those that are addressed to the worker
+    bool hadMessages;                      // whether the log held any at all
+    AudioServiceType serviceType;
+    std::int64_t reporterID;
+  };
+
+  // The service outlives this.
+  explicit TarnReportingRtcMirror(platform::RtcReportingService& service) : service_(service) {}
+  TarnReportingRtcMirror(const TarnReportingRtcMirror&) = delete;
+  TarnReportingRtcMirror& operator=(const TarnReportingRtcMirror&) = delete;
+
+  static std::uint16_t retrieveRTCReportingCategoryFromCategory(AudioEventCategory category);
+  static bool shouldBatchRTCReportingEventsForServiceType(AudioServiceType serviceType);
+
+  // Made on first use.
+  const std::shared_ptr<platform::SuspendableQueue>& rtcReportingQueue();
+
+  // The worker's own flag: the session writes it at start and stop, a completion with a list sets it.
+  bool started() const noexcept { return started_.load(); }
+  void setStarted(bool started) noexcept { started_.store(started); }
+  // Whether a session of the service can be used.
+  bool rtcReportingSessionStarted() const noexcept { return rtcReportingSessionStarted_.load(); }
+
+  // The tasks.
+  void start(const Started& session);
+  void handleMessage(const MessagePointer& message);
+  void stop(const Stopped& session);
+
+  // Sends one message; outside internal builds its record loses the time stamp. Without a session of the service
+  // nothing is sent.
+  void _sendMessage(const MessagePointer& message);  // NOLINT(readability-identifier-naming): its given name
+
+ private:
+  using Backends = std::optional<std::vector<std::string>>;
+
+  void foundBackends(const Backends& backends);  // on the service's thread
+  void endWait(bool signalled);
+  void sendSummary(const Stopped& session);
+  void release();
+
+  platform::RtcReportingService& service_;
+  std::atomic<bool> started_{false};
+  std::atomic<bool> rtcReportingSessionStarted_{false};
+  TarnReportingQueueSemaphore rtcreportingBackendSemaphore_;
+  std::shared_ptr<platform::SuspendableQueue> rtcReportingQueue_;
+  // Of the private queue.
+  std::shared_ptr<platform::RtcReportingSession> rtcReportingSession_;
+  std::optional<std::string> rtcReportingAgentToken_;
+};
+
+}  // namespace tarn

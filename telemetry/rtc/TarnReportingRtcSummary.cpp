@@ -1,0 +1,75 @@
+#include "telemetry/rtc/TarnReportingRtcSummary.h"
+
+#include <deque>
+#include <string>
+#include <unordered_map>
+
+namespace tarn {
+
+namespace {
+
+const plist::Key kSummaryEvent("Tarn_Session_Summary_Event");
+
+// The joined values of each key, keys in the order in which they were first seen.
+class Table {
+ public:
+  void append(const plist::Key& key, const plist::ValueView& value) {
+    const auto [place, isNew] = places_.try_emplace(key, lists_.size());
+    if (isNew) {
+      lists_.push_back({key, {}});
+      bytes_ += key.text().size();
+    }
+    std::string& text = lists_[place->second].text;
+    const std::size_t before = text.size();
+    if (!isNew) {
+      text += ',';
+    }
+    plist::appendDescription(text, value);
+    bytes_ += text.size() - before;
+  }
+  // Of all keys and values.
+  std::size_t bytes() const noexcept { return bytes_; }
+  plist::Dictionary payload() const {
+    std::vector<plist::Dictionary::Entry> entries;
+    entries.reserve(lists_.size());
+    for (const List& list : lists_) {
+      entries.push_back({list.key, list.text});
+    }
+    return plist::Dictionary::fromEntries(entries);
+  }
+
+ private:
+  struct List {
+    plist::Key key;
+    std::string text;
+  };
+  std::unordered_map<plist::Key, std::size_t> places_;
+  std::deque<List> lists_;
+  std::size_t bytes_ = 0;
+};
+
+}  // namespace
+
+TarnReportingRtcSummary TarnReportingMakeRtcSummary(
+    AudioServiceType serviceType, const std::vector<std::shared_ptr<TarnReportingSessionMessage>>& messages,
+    std::size_t longestText) {
+  TarnReportingRtcSummary summary;
+  Table table;
+  table.append(kSummaryEvent, static_cast<unsigned>(serviceType));
+  for (const auto& message : messages) {
+    if (message->isRedundant() || !message->isSessionStarted()) {
+      continue;
+    }
+    if (table.bytes() >= longestText) {
+      summary.complete = false;
+      break;
+    }
+    for (const plist::Dictionary::Entry& entry : message->message()) {
+      table.append(entry.key, entry.value);
+    }
+  }
+  summary.payload = table.payload();
+  return summary;
+}
+
+}  // namespace tarn

@@ -1,0 +1,35 @@
+// TarnReportingRtcSummary: folds the messages of a session into one payload, the list of its values under each key.
+//
+//   {route = a; n = 1}, {n = 2}, {route = c}   becomes   {Tarn_Session_Summary_Event = 7; route = a,c; n = 1,2}
+//
+// Values of one key stand in message order; a key that is absent from some messages has fewer of them, so places are
+// not aligned across keys.
+//
+// Threads: any.
+#pragma once
+
+#include <cstddef>
+#include <memory>
+#include <vector>
+
+#include "plist/Dictionary.h"
+#include "service/vocabulary/TarnReportingVocabulary.h"
+#include "session/TarnReportingSessionMessage.h"
+
+namespace tarn {
+
+struct TarnReportingRtcSummary {
+  // A payload has its limits, and so does what takes it in: behind so many bytes of keys and values no more messages
+  // are added. As JSON a byte may become six, and what stands in for the service takes no text of a gigabyte.
+  static constexpr std::size_t kLongestText = std::size_t{128} << 20U;
+
+  plist::Dictionary payload;
+  bool complete = true;  // false: the limit was reached
+};
+
+// Redundant messages and those that came while the session was not started are left out.
+TarnReportingRtcSummary TarnReportingMakeRtcSummary(
+    AudioServiceType serviceType, const std::vector<std::shared_ptr<TarnReportingSessionMessage>>& messages,
+    std::size_t longestText = TarnReportingRtcSummary::kLongestText);
+
+}  // namespace tarn

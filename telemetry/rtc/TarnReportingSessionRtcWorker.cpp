@@ -1,0 +1,108 @@
+#include "telemetry/rtc/TarnReportingSessionRtcWorker.h"
+
+#include <algorithm>
+#include <string>
+#include <utility>
+
+#include "platform/Facilities.h"
+#include "service/vocabulary/TarnReportingPlatform.h"
+#include "session/TarnReportingSession.h"
+#include "telemetry/rtc/TarnReportingRtcMirror.h"
+
+namespace tarn {
+
+namespace {
+
+constexpr std::string_view kServiceNameSuffix = "_session";
+
+bool isAddressedToRtc(const TarnReportingSessionMessage& message) {
+  const auto& destinations = message.destinationWorkers();
+  return destinations.empty() || std::find(destinations.begin(), destinations.end(),
+                                           TarnReportingSessionRtcWorker::kClassName) != destinations.end();
+}
+
+// The destinations are read here: a copy is addressed to everyone.
+TarnReportingRtcMirror::Stopped snapshotOf(const TarnReportingSession& session) {
+  TarnReportingRtcMirror::Stopped stopped{{}, !session.messages().empty(), session.serviceType(), session.reporterID()};
+  stopped.messages.reserve(session.messages().size());
+  for (const auto& message : session.messages()) {
+    auto copy = message->copyWithZone();
+    if (isAddressedToRtc(*message)) {
+      stopped.messages.push_back(std::move(copy));
+    }
+  }
+  return stopped;
+}
+
+}  // namespace
+
+std::unique_ptr<TarnReportingSessionRtcWorker> TarnReportingSessionRtcWorker::initWithSession(
+    const std::shared_ptr<TarnReportingSession>& session) {
+  platform::RtcReportingService* const service = TarnReportingFacilities().rtcReporting;
+  if (service == nullptr || session->serviceType() == AudioServiceType::Test) {
+    return nullptr;
+  }
+  return std::make_unique<TarnReportingSessionRtcWorker>(session, std::make_shared<TarnReportingRtcMirror>(*service));
+}
+
+TarnReportingSessionRtcWorker::TarnReportingSessionRtcWorker(std::weak_ptr<TarnReportingSession> session,
+                                                             std::shared_ptr<TarnReportingRtcMirror> mirror)
+    : TarnReportingSessionWorkerProtocol(std::move(session)), mirror_(std::move(mirror)) {}
+
+std::uint16_t TarnReportingSessionRtcWorker::retrieveRTCReportingCategoryFromCategory(AudioEventCategory category) {
+  return TarnReportingRtcMirror::retrieveRTCReportingCategoryFromCategory(category);
+}
+
+bool TarnReportingSessionRtcWorker::shouldBatchRTCReportingEventsForServiceType(AudioServiceType serviceType) {
+  return TarnReportingRtcMirror::shouldBatchRTCReportingEventsForServiceType(serviceType);
+}
+
+bool TarnReportingSessionRtcWorker::started() const noexcept {
+  return mirror_->started();
+}
+
+void TarnReportingSessionRtcWorker::setStarted(bool started) noexcept {
+  mirror_->setStarted(started);
+}
+
+bool TarnReportingSessionRtcWorker::getRTCReportingStartedState() const noexcept {
+  return mirror_->rtcReportingSessionStarted();
+}
+
+const std::shared_ptr<platform::SuspendableQueue>& TarnReportingSessionRtcWorker::rtcReportingQueue() {
+  return mirror_->rtcReportingQueue();
+}
+
+bool TarnReportingSessionRtcWorker::start() {
+  const std::shared_ptr<TarnReportingSession> owner = session();
+  if (!owner || owner->serviceType() == AudioServiceType::Test) {
+    return false;
+  }
+  std::string serviceName(owner->serviceName());
+  serviceName += kServiceNameSuffix;
+  rtcReportingQueue()->async(
+      [mirror = mirror_, started = TarnReportingRtcMirror::Started{
+                             owner->configuration(), std::move(serviceName), owner->serviceType(), owner->reporterID(),
+                             owner->isSingleMessageSession()}] { mirror->start(started); });
+  return true;
+}
+
+void TarnReportingSessionRtcWorker::handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) {
+  auto copy = std::make_shared<TarnReportingSessionMessage>(message->message(), message->category(), message->type());
+  rtcReportingQueue()->async([mirror = mirror_, copy = std::move(copy)] { mirror->handleMessage(copy); });
+}
+
+void TarnReportingSessionRtcWorker::stop() {
+  const std::shared_ptr<TarnReportingSession> owner = session();
+  if (!owner) {
+    return;
+  }
+  rtcReportingQueue()->async([mirror = mirror_, stopped = snapshotOf(*owner)] { mirror->stop(stopped); });
+}
+
+// NOLINTNEXTLINE(readability-identifier-naming): its given name
+void TarnReportingSessionRtcWorker::_sendMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) {
+  mirror_->_sendMessage(message);
+}
+
+}  // namespace tarn

@@ -1,0 +1,48 @@
+#include "testing/backends/FakePerfDataWriters.h"
+
+namespace tarn::testing {
+
+class FakePerfDataWriters::Writer final : public platform::PerfDataWriter {
+ public:
+  Writer(std::shared_ptr<File> file, platform::MaybeError closeError)
+      : file_(std::move(file)), closeError_(std::move(closeError)) {}
+
+  void newValue(std::string_view name, platform::PerfDataUnit, double value) override {
+    file_->values.emplace_back(name, value);
+  }
+  Extension startExtension(std::string_view name) override {
+    file_->extensions.push_back({std::string(name), {}, false});
+    return static_cast<Extension>(file_->extensions.size());
+  }
+  void stringMember(Extension extension, std::string_view name, std::string_view text) override {
+    file_->extensions.at(extension - 1).members.emplace_back(name, text);
+  }
+  void endExtension(Extension extension) override { file_->extensions.at(extension - 1).ended = true; }
+  platform::MaybeError close() override {
+    file_->closed = !closeError_;
+    return closeError_;
+  }
+
+ private:
+  const std::shared_ptr<File> file_;
+  const platform::MaybeError closeError_;
+};
+
+FakePerfDataWriters::FakePerfDataWriters() = default;
+FakePerfDataWriters::~FakePerfDataWriters() = default;
+
+platform::Outcome<std::unique_ptr<platform::PerfDataWriter>> FakePerfDataWriters::open(std::string_view path,
+                                                                                       std::string_view name,
+                                                                                       std::int32_t resultsVersion,
+                                                                                       std::uint32_t flags) {
+  if (openError_) return {nullptr, openError_};
+  auto file = std::make_shared<File>();
+  file->path = path;
+  file->name = name;
+  file->resultsVersion = resultsVersion;
+  file->flags = flags;
+  files_.push_back(file);
+  return {std::make_unique<Writer>(std::move(file), closeError_), {}};
+}
+
+}  // namespace tarn::testing

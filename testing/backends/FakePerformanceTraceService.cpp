@@ -1,0 +1,140 @@
+#include "testing/backends/FakePerformanceTraceService.h"
+
+#include <mutex>
+#include <utility>
+
+namespace tarn::testing {
+
+using platform::MaybeError;
+using platform::PerformanceTraceDelegate;
+
+struct FakePerformanceTraceService::Ledger {
+  std::mutex mutex;
+  bool makesSessions = true;
+  MaybeError startError;
+  MaybeError stopError;
+  MaybeError completionError;
+  std::vector<Trace> traces;
+  ReplyFaults callbacks;
+};
+
+class FakePerformanceTraceService::Session final : public platform::PerformanceTraceSession,
+                                                   public std::enable_shared_from_this<Session> {
+ public:
+  Session(std::shared_ptr<Ledger> ledger, std::size_t index) : ledger_(std::move(ledger)), index_(index) {}
+  ~Session() override {
+    const std::lock_guard lock(ledger_->mutex);
+    ledger_->traces[index_].released = true;
+  }
+  Session(const Session&) = delete;
+  Session& operator=(const Session&) = delete;
+
+  void setDelegate(std::weak_ptr<PerformanceTraceDelegate> delegate) override {
+    const std::lock_guard lock(ledger_->mutex);
+    delegate_ = std::move(delegate);
+  }
+
+  void startTrace() override {
+    MaybeError error;
+    {
+      const std::lock_guard lock(ledger_->mutex);
+      ++ledger_->traces[index_].starts;
+      error = ledger_->startError;
+      valid_ = !error;
+    }
+    // A session that was let go of makes no more callbacks.
+    ledger_->callbacks.deliver([weak = weak_from_this(), error] {
+      if (const auto self = weak.lock()) self->tell([&](auto& delegate) { delegate.performanceTraceDidStart(error); });
+    });
+  }
+
+  void stopTrace() override {
+    MaybeError stopError;
+    MaybeError completionError;
+    {
+      const std::lock_guard lock(ledger_->mutex);
+      ++ledger_->traces[index_].stops;
+      stopError = ledger_->stopError;
+      completionError = ledger_->completionError;
+      valid_ = false;
+    }
+    ledger_->callbacks.deliver([weak = weak_from_this(), stopError, completionError] {
+      if (const auto self = weak.lock()) self->tellStopped(stopError, completionError);
+    });
+  }
+
+  bool isValid() const override {
+    const std::lock_guard lock(ledger_->mutex);
+    return valid_;
+  }
+
+ private:
+  template <class Call>
+  void tell(Call call) {
+    std::shared_ptr<PerformanceTraceDelegate> delegate;
+    {
+      const std::lock_guard lock(ledger_->mutex);
+      delegate = delegate_.lock();
+    }
+    if (delegate != nullptr) call(*delegate);
+  }
+
+  void tellStopped(const MaybeError& stopError, const MaybeError& completionError) {
+    tell([&](auto& delegate) { delegate.performanceTraceDidStop(stopError); });
+    if (stopError) return;
+    const auto number = std::to_string(index_ + 1);
+    const auto location = completionError ? std::string() : "/device/traces/" + number;
+    tell([&](auto& delegate) { delegate.performanceTraceDidComplete(location, "trace-" + number, completionError); });
+  }
+
+  const std::shared_ptr<Ledger> ledger_;
+  const std::size_t index_;
+  std::weak_ptr<PerformanceTraceDelegate> delegate_;
+  bool valid_ = false;
+};
+
+FakePerformanceTraceService::FakePerformanceTraceService() : ledger_(std::make_shared<Ledger>()) {}
+
+// Here, not with the ledger: a callback that runs may hold the last session, and a thread can't wait for itself.
+FakePerformanceTraceService::~FakePerformanceTraceService() {
+  ledger_->callbacks.joinThreads();
+}
+
+std::shared_ptr<platform::PerformanceTraceSession> FakePerformanceTraceService::createSession(
+    const platform::PerformanceTraceConfiguration& configuration) {
+  const std::lock_guard lock(ledger_->mutex);
+  if (!ledger_->makesSessions) return nullptr;
+  ledger_->traces.push_back({configuration, 0, 0, false});
+  return std::make_shared<Session>(ledger_, ledger_->traces.size() - 1);
+}
+
+void FakePerformanceTraceService::setMakesSessions(bool makes) {
+  const std::lock_guard lock(ledger_->mutex);
+  ledger_->makesSessions = makes;
+}
+
+void FakePerformanceTraceService::failStart(MaybeError error) {
+  const std::lock_guard lock(ledger_->mutex);
+  ledger_->startError = std::move(error);
+}
+
+void FakePerformanceTraceService::failStop(MaybeError error) {
+  const std::lock_guard lock(ledger_->mutex);
+  ledger_->stopError = std::move(error);
+}
+
+void FakePerformanceTraceService::failCompletion(MaybeError error) {
+  const std::lock_guard lock(ledger_->mutex);
+  ledger_->completionError = std::move(error);
+}
+
+ReplyFaults& FakePerformanceTraceService::callbacks() {
+  return ledger_->callbacks;
+}
+
+std::vector<FakePerformanceTraceService::Trace> FakePerformanceTraceService::traces() const {
+  const std::lock_guard lock(ledger_->mutex);
+  return ledger_->traces;
+}
+
+}  // namespace tarn::testing

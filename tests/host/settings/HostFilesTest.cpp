@@ -1,0 +1,203 @@
+// The files that the service is given: configuration and device properties.
+#include <gtest/gtest.h>
+
+#include "host/settings/HostConfiguration.h"
+#include "host/settings/JsonDeviceProperties.h"
+#include "tests/host/TemporaryFolder.h"
+
+namespace tarn::linux_host {
+namespace {
+
+std::string errorOf(std::string_view text) {
+  const ReadConfiguration read = parseConfiguration(text, "c.toml");
+  EXPECT_NE(read.configuration.has_value(), !read.error.empty());
+  return read.error;
+}
+
+TEST(HostConfiguration, EmptyFileHasEveryDefault) {
+  const ReadConfiguration read = parseConfiguration("", "c.toml");
+  ASSERT_TRUE(read.configuration) << read.error;
+  const HostConfiguration& host = *read.configuration;
+  EXPECT_EQ(host.tally.inUse, (std::vector<std::string>{"*"}));
+  EXPECT_EQ(host.rtc.backends, (std::vector<std::string>{"recorder"}));
+  EXPECT_FALSE(host.rtc.noBackends);
+  EXPECT_TRUE(host.rtc.available);
+  EXPECT_EQ(host.rtc.startDelay.count(), 0);
+  EXPECT_FALSE(host.snare.refuse);
+  EXPECT_FALSE(host.paths.diagnosticLogs);
+  EXPECT_FALSE(host.paths.flume);
+  EXPECT_FALSE(host.paths.alsa);
+  EXPECT_FALSE(host.paths.traceAnalysis);
+  EXPECT_EQ(host.recorder.maximumMegabytes, 256U);
+  EXPECT_EQ(host.recorder.maximumAgeDays, 30U);
+  EXPECT_EQ(host.limits.maximumFrameBytes, 1048576U);
+}
+
+TEST(HostConfiguration, EverySettingIsRead) {
+  const ReadConfiguration read = parseConfiguration(R"(
+[tally]
+in_use = ["sys.oxbow.*", "other"]
+[rtc]
+backends = []
+no_backends = true
+available = false
+start_delay_ms = 1500
+[snare]
+refuse = "DailyLimitExceeded"
+[paths]
+diagnostic_logs = "/var/log/audio"
+flume = "/run/flume"
+alsa = "/proc/asound"
+trace_analysis = "/opt/analysis.so"
+[recorder]
+max_megabytes = 1
+max_age_days = 7
+[limits]
+max_frame_bytes = 65536
+)",
+                                                    "c.toml");
+  ASSERT_TRUE(read.configuration) << read.error;
+  const HostConfiguration& host = *read.configuration;
+  EXPECT_EQ(host.tally.inUse, (std::vector<std::string>{"sys.oxbow.*", "other"}));
+  EXPECT_TRUE(host.rtc.backends.empty());
+  EXPECT_TRUE(host.rtc.noBackends);
+  EXPECT_FALSE(host.rtc.available);
+  EXPECT_EQ(host.rtc.startDelay, std::chrono::milliseconds(1500));
+  EXPECT_EQ(host.snare.refuse, platform::SnareReason::DailyLimitExceeded);
+  EXPECT_EQ(host.paths.diagnosticLogs, "/var/log/audio");
+  EXPECT_EQ(host.paths.flume, "/run/flume");
+  EXPECT_EQ(host.paths.alsa, "/proc/asound");
+  EXPECT_EQ(host.paths.traceAnalysis, "/opt/analysis.so");
+  EXPECT_EQ(host.recorder.maximumMegabytes, 1U);
+  EXPECT_EQ(host.recorder.maximumAgeDays, 7U);
+  EXPECT_EQ(host.limits.maximumFrameBytes, 65536U);
+}
+
+TEST(HostConfiguration, UnknownKeysAndSectionsAreErrorsWithTheirLine) {
+  EXPECT_EQ(errorOf("[tally]\nin_use = []\nin_usee = []\n"), "c.toml:3: unknown key \"tally.in_usee\"");
+  EXPECT_EQ(errorOf("\n[taly]\n"), "c.toml:2: unknown section [taly]");
+  EXPECT_EQ(errorOf("in_use = []\n"), "c.toml:1: unknown key \"in_use\"");
+  EXPECT_EQ(errorOf("[rtc.more]\nx = 1\n"), "c.toml:1: unknown key \"rtc.more\"");
+  EXPECT_EQ(errorOf("rtc = 5\n"), "c.toml:1: [rtc] must be a section");
+}
+
+TEST(HostConfiguration, ErrorThatStandsFirstInTheFileIsTold) {
+  EXPECT_EQ(errorOf("[tally]\nx = 1\n[limits]\ny = 1\n"), "c.toml:2: unknown key \"tally.x\"");
+  EXPECT_EQ(errorOf("[tally]\nx = 1\na = 1\n"), "c.toml:2: unknown key \"tally.x\"");
+}
+
+TEST(HostConfiguration, WrongTypesAreErrorsWithTheirLine) {
+  EXPECT_EQ(errorOf("[tally]\nin_use = \"*\"\n"), "c.toml:2: \"tally.in_use\" must be a list of texts");
+  EXPECT_EQ(errorOf("[rtc]\nbackends = [\"a\", 1]\n"), "c.toml:2: \"rtc.backends\" must be a list of texts");
+  EXPECT_EQ(errorOf("[rtc]\n\navailable = 1\n"), "c.toml:3: \"rtc.available\" must be true or false");
+  EXPECT_EQ(errorOf("[rtc]\nno_backends = \"no\"\n"), "c.toml:2: \"rtc.no_backends\" must be true or false");
+  EXPECT_EQ(errorOf("[snare]\nrefuse = false\n"), "c.toml:2: \"snare.refuse\" must be a text");
+  EXPECT_EQ(errorOf("[paths]\nflume = 1\n"), "c.toml:2: \"paths.flume\" must be a folder's path");
+  EXPECT_EQ(errorOf("[paths]\nalsa = true\n"), "c.toml:2: \"paths.alsa\" must be a folder's path");
+  EXPECT_EQ(errorOf("[paths]\ndiagnostic_logs = \"\"\n"),
+            "c.toml:2: \"paths.diagnostic_logs\" must be a folder's path");
+  EXPECT_EQ(errorOf("[paths]\ntrace_analysis = []\n"), "c.toml:2: \"paths.trace_analysis\" must be a file's path");
+  EXPECT_EQ(errorOf("[recorder]\nmax_megabytes = 1.0\n"),
+            "c.toml:2: \"recorder.max_megabytes\" must be a whole number from 1 to 1048576");
+}
+
+TEST(HostConfiguration, ARefusalIsTheNameOfAReasonCode) {
+  for (std::size_t code = 0; code < platform::kSnareReasonNames.size(); ++code) {
+    const std::string name(platform::kSnareReasonNames[code]);
+    const ReadConfiguration read = parseConfiguration("[snare]\nrefuse = \"" + name + "\"\n", "c.toml");
+    ASSERT_TRUE(read.configuration) << read.error;
+    EXPECT_EQ(read.configuration->snare.refuse, static_cast<platform::SnareReason>(code)) << name;
+  }
+  const ReadConfiguration none = parseConfiguration("[snare]\nrefuse = \"\"\n", "c.toml");
+  ASSERT_TRUE(none.configuration) << none.error;
+  EXPECT_FALSE(none.configuration->snare.refuse);
+  for (const char* wrong : {"dailylimitexceeded", "DailyLimitExceeded ", "6", "kAilmentErrorNone"}) {
+    EXPECT_EQ(errorOf("\n[snare]\nrefuse = \"" + std::string(wrong) + "\"\n"),
+              "c.toml:3: \"snare.refuse\" must be the name of a reason code, or empty");
+  }
+}
+
+TEST(HostConfiguration, NumbersAreReadToTheirLimitsAndRefusedBehindThem) {
+  struct Range {
+    std::string section;
+    std::string key;
+    std::int64_t lowest;
+    std::int64_t highest;
+  };
+  const std::vector<Range> ranges{{"rtc", "start_delay_ms", 0, 3600000},
+                                  {"recorder", "max_megabytes", 1, 1048576},
+                                  {"recorder", "max_age_days", 1, 36500},
+                                  {"limits", "max_frame_bytes", 64, 67108864}};
+  for (const Range& range : ranges) {
+    const auto with = [&](std::int64_t number) {
+      return errorOf("[" + range.section + "]\n" + range.key + " = " + std::to_string(number) + "\n");
+    };
+    const std::string refusal = "c.toml:2: \"" + range.section + "." + range.key + "\" must be a whole number from " +
+                                std::to_string(range.lowest) + " to " + std::to_string(range.highest);
+    EXPECT_EQ(with(range.lowest), "");
+    EXPECT_EQ(with(range.highest), "");
+    EXPECT_EQ(with(range.lowest - 1), refusal);
+    EXPECT_EQ(with(range.highest + 1), refusal);
+  }
+}
+
+TEST(HostConfiguration, SyntaxErrorNamesItsLine) {
+  EXPECT_EQ(errorOf("[tally]\n\nin_use = nope\n[rtc]\n").substr(0, 9), "c.toml:3:");
+  EXPECT_EQ(errorOf("[tally]\n[tally]\n").substr(0, 9), "c.toml:2:");
+}
+
+TEST(HostConfiguration, LettersOutsideAsciiAreReadInTextsAndRefusedAsKeys) {
+  const ReadConfiguration read = parseConfiguration("[paths]\nflume = \"\"\"\\\n \xd1\x90\xc3\xa9\"\"\"\n", "c.toml");
+  ASSERT_TRUE(read.configuration) << read.error;
+  EXPECT_EQ(read.configuration->paths.flume, "\xd1\x90\xc3\xa9");
+  EXPECT_EQ(errorOf("[paths]\n\xd1\x90 = 1\n").substr(0, 10), "c.toml:2: ");
+}
+
+TEST(HostConfiguration, ErrorsAreOneLine) {
+  EXPECT_EQ(errorOf("[\"a\\nb\"]\n"), "c.toml:1: unknown section [a\\nb]");
+}
+
+TEST(HostConfiguration, FileIsReadAndOneThatCannotBeIsNamed) {
+  const TemporaryFolder folder;
+  folder.write("good.toml", "[recorder]\nmax_age_days = 2\n");
+  folder.write("bad.toml", "\nx = 1\n");
+  EXPECT_EQ(readConfiguration(folder.path("good.toml")).configuration->recorder.maximumAgeDays, 2U);
+  EXPECT_EQ(readConfiguration(folder.path("bad.toml")).error, folder.path("bad.toml") + ":2: unknown key \"x\"");
+  EXPECT_EQ(readConfiguration(folder.path("none")).error, folder.path("none") + ": No such file or directory");
+  EXPECT_EQ(readConfiguration(folder.path()).error, folder.path() + ": Is a directory");
+}
+
+TEST(JsonDeviceProperties, WithoutAFileTheDeviceHasNeitherProperty) {
+  const JsonDeviceProperties properties;
+  EXPECT_EQ(properties.boolean("InternalBuild"), false);
+  EXPECT_EQ(properties.boolean("haptics"), false);
+  EXPECT_FALSE(properties.boolean("other"));
+}
+
+TEST(JsonDeviceProperties, FileTellsWhatTheDeviceIsAndNothingElseIsKnown) {
+  const TemporaryFolder folder;
+  folder.write("p.json", R"({"InternalBuild": true, "newer": {"any": [1]}, "flag": true})");
+  JsonDeviceProperties properties;
+  ASSERT_EQ(properties.load(folder.path("p.json")), "");
+  EXPECT_EQ(properties.boolean("InternalBuild"), true);
+  EXPECT_EQ(properties.boolean("flag"), true);
+  EXPECT_FALSE(properties.boolean("haptics"));
+  EXPECT_FALSE(properties.boolean("newer"));
+}
+
+TEST(JsonDeviceProperties, WrongFilesAreToldWithTheirPlaceAndChangeNothing) {
+  const TemporaryFolder folder;
+  const std::string path = folder.path("p.json");
+  JsonDeviceProperties properties;
+  folder.write("p.json", "{\n\"newer\": 1,\n\"haptics\": 1}");
+  EXPECT_EQ(properties.load(path), path + ":3: \"haptics\" must be true or false");
+  folder.write("p.json", "{\n\"haptics\": yes}");
+  EXPECT_EQ(properties.load(path).substr(0, path.size() + 6), path + ":2:12:");
+  folder.write("p.json", "[]");
+  EXPECT_EQ(properties.load(path), path + ":1:1: device properties are one JSON object");
+  EXPECT_EQ(properties.load(folder.path("none")), folder.path("none") + ": No such file or directory");
+  EXPECT_EQ(properties.boolean("haptics"), false);
+}
+
+}  // namespace
+}  // namespace tarn::linux_host

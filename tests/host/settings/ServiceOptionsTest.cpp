@@ -1,0 +1,154 @@
+#include "host/settings/ServiceOptions.h"
+
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+
+#include <algorithm>
+#include <vector>
+
+#include "host/settings/StateFolder.h"
+#include "tests/host/TemporaryFolder.h"
+
+namespace tarn::linux_host {
+namespace {
+
+const HostEnvironment kUser{false, "/run/user/7", "/srv/u/state", "/srv/u"};
+
+ServiceCommand parse(std::vector<const char*> arguments, const HostEnvironment& environment = kUser) {
+  arguments.insert(arguments.begin(), "tarnreportingd");
+  return parseServiceCommand(static_cast<int>(arguments.size()), arguments.data(), environment);
+}
+
+std::string complaintOf(std::vector<const char*> arguments, const HostEnvironment& environment = kUser) {
+  const ServiceCommand command = parse(std::move(arguments), environment);
+  EXPECT_FALSE(command.options);
+  EXPECT_EQ(command.exitStatus, 64);
+  EXPECT_EQ(command.output, "");
+  EXPECT_EQ(std::count(command.complaint.begin(), command.complaint.end(), '\n'), 1);
+  return command.complaint;
+}
+
+TEST(ServiceOptions, DefaultsFollowTheUsersFolders) {
+  const ServiceCommand command = parse({});
+  ASSERT_TRUE(command.options);
+  EXPECT_EQ(command.options->socketPath, "/run/user/7/tarnreporting.sock");
+  EXPECT_EQ(command.options->stateDirectory, "/srv/u/state/tarnreporting");
+  EXPECT_FALSE(command.options->configurationFile);
+  EXPECT_FALSE(command.options->devicePropertiesFile);
+  EXPECT_EQ(command.options->logLevel, platform::LogLevel::Default);
+  EXPECT_EQ(command.options->logTarget, "stderr");
+}
+
+TEST(ServiceOptions, DefaultsOfRootAreTheSystemsWhateverItsEnvironment) {
+  const ServiceCommand command = parse({}, {true, "/run/user/0", "/srv/root/state", "/srv/root"});
+  ASSERT_TRUE(command.options);
+  EXPECT_EQ(command.options->socketPath, "/run/tarnreporting/socket");
+  EXPECT_TRUE(command.options->socketIsDefault);
+  EXPECT_EQ(command.options->stateDirectory, "/var/lib/tarnreporting");
+}
+
+TEST(ServiceOptions, UnsetAndRelativeVariablesDoNotCount) {
+  const ServiceCommand command = parse({}, {false, "run", "state", "/srv/u"});
+  ASSERT_TRUE(command.options);
+  EXPECT_FALSE(command.options->socketPath);
+  EXPECT_EQ(command.options->stateDirectory, "/srv/u/.local/state/tarnreporting");
+  EXPECT_EQ(complaintOf({}, {false, "", "", ""}),
+            "tarnreportingd: --state-dir: must be given, neither XDG_STATE_HOME nor HOME names a folder\n");
+}
+
+TEST(ServiceOptions, EveryOptionIsTaken) {
+  const ServiceCommand command = parse({"--socket", "/s", "--state-dir=/d", "--config", "c", "--device-properties", "p",
+                                        "--log-level", "debug", "--log-target", "journal"});
+  ASSERT_TRUE(command.options);
+  EXPECT_EQ(command.options->socketPath, "/s");
+  EXPECT_FALSE(command.options->socketIsDefault);
+  EXPECT_EQ(command.options->stateDirectory, "/d");
+  EXPECT_EQ(command.options->configurationFile, "c");
+  EXPECT_EQ(command.options->devicePropertiesFile, "p");
+  EXPECT_EQ(command.options->logLevel, platform::LogLevel::Debug);
+  EXPECT_EQ(command.options->logTarget, "journal");
+}
+
+TEST(ServiceOptions, UsageErrorsAreOneLineThatNamesTheOption) {
+  EXPECT_EQ(complaintOf({"--log-level", "loud"}),
+            "tarnreportingd: --log-level: \"loud\" is none of debug, info, default, error\n");
+  EXPECT_EQ(complaintOf({"--socket="}), "tarnreportingd: --socket: 1 required PATH missing\n");
+  EXPECT_EQ(complaintOf({"--state-dir", ""}), "tarnreportingd: --state-dir: must not be empty\n");
+  EXPECT_NE(complaintOf({"--config"}).find("--config"), std::string::npos);
+  EXPECT_NE(complaintOf({"--loud"}).find("--loud"), std::string::npos);
+  EXPECT_NE(complaintOf({"stray\nline"}).find("stray line"), std::string::npos);
+  EXPECT_NE(complaintOf({"--socket", "a", "--socket", "b"}).find("--socket"), std::string::npos);
+}
+
+TEST(ServiceOptions, HelpNamesEveryOptionDefaultAndExitStatus) {
+  const ServiceCommand command = parse({"--help"});
+  EXPECT_FALSE(command.options);
+  EXPECT_EQ(command.exitStatus, 0);
+  EXPECT_EQ(command.complaint, "");
+  for (const char* part :
+       {"--socket PATH", "--state-dir DIR", "--config FILE", "--device-properties FILE", "--log-level LEVEL",
+        "--log-target stderr|journal|FILE", "--version", "--help", "$XDG_RUNTIME_DIR/tarnreporting.sock",
+        "/run/tarnreporting/socket", "$XDG_STATE_HOME/tarnreporting", "/var/lib/tarnreporting", "LISTEN_FDS",
+        "debug, info, default or error", "Exit status: 0", "64 for wrong usage", "78 for a wrong configuration",
+        "1 when it can't serve", "2 when a client ended it"}) {
+    EXPECT_NE(command.output.find(part), std::string::npos) << part;
+  }
+}
+
+TEST(ServiceOptions, VersionIsOneLine) {
+  const ServiceCommand command = parse({"--version"});
+  EXPECT_FALSE(command.options);
+  EXPECT_EQ(command.exitStatus, 0);
+  EXPECT_EQ(command.output, "tarnreportingd " TARN_VERSION "\n");
+}
+
+TEST(StateFolder, StateDirectoryIsMadeWithItsParents) {
+  const TemporaryFolder folder;
+  EXPECT_EQ(prepareStateDirectory(folder.path("a/b/tarnreporting")), "");
+  struct stat facts {};
+  ASSERT_EQ(::stat(folder.path("a/b/tarnreporting").c_str(), &facts), 0);
+  EXPECT_EQ(facts.st_mode & 0777U & ~0750U, 0U);
+  EXPECT_EQ(prepareStateDirectory(folder.path("a/b/tarnreporting/")), "");
+}
+
+TEST(StateFolder, StateDirectoryThatCannotBeMadeIsToldWithItsPathAndReason) {
+  const TemporaryFolder folder;
+  folder.write("file", "");
+  EXPECT_EQ(prepareStateDirectory(folder.path("file")), "state directory " + folder.path("file") + ": Not a directory");
+  EXPECT_EQ(prepareStateDirectory(folder.path("file/below")),
+            "state directory " + folder.path("file/below") + ": Not a directory");
+  EXPECT_EQ(prepareStateDirectory("/proc/none"), "state directory /proc/none: No such file or directory");
+}
+
+TEST(StateFolder, StateDirectoryIsHeldByOneServiceAtATime) {
+  constexpr std::chrono::milliseconds kPatience{20};
+  const TemporaryFolder folder;
+  FileLock second;
+  {
+    FileLock first;
+    EXPECT_EQ(holdStateDirectory(folder.path(), first, kPatience), "");
+    EXPECT_EQ(holdStateDirectory(folder.path(), second, kPatience),
+              "another service uses the state directory " + folder.path());
+  }
+  EXPECT_EQ(holdStateDirectory(folder.path(), second, kPatience), "");
+}
+
+TEST(StateFolder, StateDirectoryThatCannotBeHeldIsToldWithItsPathAndReason) {
+  const TemporaryFolder folder;
+  FileLock lock;
+  EXPECT_EQ(holdStateDirectory(folder.path("none"), lock),
+            "state directory " + folder.path("none") + ": No such file or directory");
+}
+
+TEST(StateFolder, ReplacedFileLeavesNoTemporaryBehindEvenWhenItFails) {
+  const TemporaryFolder folder;
+  EXPECT_EQ(replaceFile(folder.path("f"), folder.path(".f.tmp"), "content"), 0);
+  EXPECT_EQ(folder.read("f"), "content");
+  std::filesystem::create_directory(folder.path("taken"));
+  EXPECT_EQ(replaceFile(folder.path("taken"), folder.path(".t.tmp"), "content"), EISDIR);
+  EXPECT_FALSE(std::filesystem::exists(folder.path(".t.tmp")));
+  EXPECT_FALSE(std::filesystem::exists(folder.path(".f.tmp")));
+}
+
+}  // namespace
+}  // namespace tarn::linux_host

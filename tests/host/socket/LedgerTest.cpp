@@ -1,0 +1,63 @@
+#include "host/socket/Ledger.h"
+
+#include <gtest/gtest.h>
+
+#include <string>
+#include <vector>
+
+#include "host/system/DescriptorLimit.h"
+
+namespace tarn::linux_host {
+namespace {
+
+TEST(Ledger, StatusHasEveryMemberFromTheStart) {
+  const auto status = Ledger().status(0, 0, {});
+  for (const char* member : {"frames_received", "messages_received", "replies_sent", "connections_open",
+                             "connections_total", "sessions", "queued", "recorder_handed_over", "recorder_committed",
+                             "recorder_waiting", "recorder_expired", "recorder_failed"}) {
+    EXPECT_EQ(status.get(member), plist::ValueView(0)) << member;
+  }
+  EXPECT_EQ(plist::description(status.get("requests_refused")),
+            "{unknown_operation = 0; bad_arguments = 0; not_property_list = 0}");
+  EXPECT_EQ(plist::description(status.get("connections_cut")),
+            "{unreadable_frame = 0; oversize_frame = 0; unread_replies = 0; half_frame = 0; reset = 0}");
+}
+
+TEST(Ledger, StatusTellsWhatOthersCount) {
+  const auto status = Ledger().status(3, 4, {10, 7, 2, 5, 1});
+  EXPECT_EQ(status.get("sessions").asInt64(), 3);
+  EXPECT_EQ(status.get("queued").asInt64(), 4);
+  EXPECT_EQ(status.get("recorder_handed_over").asInt64(), 10);
+  EXPECT_EQ(status.get("recorder_committed").asInt64(), 7);
+  EXPECT_EQ(status.get("recorder_waiting").asInt64(), 2);
+  EXPECT_EQ(status.get("recorder_expired").asInt64(), 5);
+  EXPECT_EQ(status.get("recorder_failed").asInt64(), 1);
+}
+
+TEST(Ledger, CountsRefusalsAndCutsByReason) {
+  Ledger ledger;
+  ledger.countRefusal(wire::ErrorCode::BadArguments);
+  ledger.countRefusal(wire::ErrorCode::BadArguments);
+  ledger.countCut(CutReason::UnreadReplies);
+  const auto status = ledger.status(0, 0, {});
+  EXPECT_EQ(plist::description(status.get("requests_refused")),
+            "{unknown_operation = 0; bad_arguments = 2; not_property_list = 0}");
+  EXPECT_EQ(plist::description(status.get("connections_cut")),
+            "{unreadable_frame = 0; oversize_frame = 0; unread_replies = 1; half_frame = 0; reset = 0}");
+}
+
+TEST(DescriptorLimit, LeavesRoomForTheRestOfTheProcess) {
+  EXPECT_EQ(connectionsWithin(1024), 960u);
+  EXPECT_EQ(connectionsWithin(129), 65u);
+  EXPECT_EQ(connectionsWithin(128), 64u);
+  EXPECT_EQ(connectionsWithin(1), 1u);
+}
+
+TEST(DescriptorLimit, IsRaisedAsFarAsTheSystemLets) {
+  const auto raised = raiseDescriptorLimit();
+  EXPECT_EQ(raiseDescriptorLimit(), raised);
+  EXPECT_GE(raised, 256u);
+}
+
+}  // namespace
+}  // namespace tarn::linux_host

@@ -1,0 +1,234 @@
+#include "host/socket/ListenSocket.h"
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <stdlib.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/un.h>
+
+#include <cstring>
+#include <filesystem>
+#include <fstream>
+#include <thread>
+#include <vector>
+
+#include "tests/host/InChild.h"
+#include "tests/host/ScratchFolder.h"
+
+namespace tarn::linux_host {
+namespace {
+
+sockaddr_un addressOf(const std::string& path) {
+  sockaddr_un address{};
+  address.sun_family = AF_UNIX;
+  std::memcpy(address.sun_path, path.data(), path.size());
+  return address;
+}
+
+UniqueDescriptor boundSocket(const std::string& path, int type = SOCK_STREAM) {
+  UniqueDescriptor socket(::socket(AF_UNIX, type | SOCK_CLOEXEC, 0));
+  const auto address = addressOf(path);
+  EXPECT_EQ(::bind(socket.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
+  return socket;
+}
+
+bool canConnect(const std::string& path) {
+  const UniqueDescriptor socket(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
+  const auto address = addressOf(path);
+  return ::connect(socket.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0;
+}
+
+mode_t modeOf(const std::string& path) {
+  struct stat file {};
+  EXPECT_EQ(::lstat(path.c_str(), &file), 0);
+  return file.st_mode & 07777;
+}
+
+class ListenSocketTest : public ::testing::Test {
+ protected:
+  testing::ScratchFolder folder_;
+  const std::string path_ = folder_.file("socket");
+};
+
+TEST_F(ListenSocketTest, ListensAtAFreshPath) {
+  const auto result = ListenSocket::bindTo(path_);
+  EXPECT_EQ(result.error, "");
+  EXPECT_TRUE(canConnect(path_));
+  EXPECT_EQ(result.socket.name(), path_);
+}
+
+TEST_F(ListenSocketTest, ClaimedPathHasNothingToConnectToBeforeItListens) {
+  auto claimed = ListenSocket::claim(path_);
+  EXPECT_EQ(claimed.error, "");
+  EXPECT_TRUE(claimed.socket);
+  EXPECT_FALSE(std::filesystem::exists(path_));
+  EXPECT_EQ(ListenSocket::claim(path_).error, "another service is listening on " + path_);
+  EXPECT_EQ(claimed.socket.listen(), "");
+  EXPECT_TRUE(canConnect(path_));
+}
+
+TEST_F(ListenSocketTest, ClaimedPathThatSomethingElseTookIsToldWhenItListens) {
+  auto claimed = ListenSocket::claim(path_);
+  std::ofstream(path_) << "something else";
+  EXPECT_EQ(claimed.socket.listen(), "can't listen on " + path_ + ": Address already in use");
+  claimed.socket = ListenSocket();
+  EXPECT_TRUE(std::filesystem::exists(path_));
+}
+
+TEST_F(ListenSocketTest, HasTheModeWhateverTheMaskAndLeavesTheMaskAlone) {
+  const mode_t before = ::umask(0);
+  const auto usual = ListenSocket::bindTo(path_);
+  const auto wide = ListenSocket::bindTo(folder_.file("wide"), 0666);
+  EXPECT_EQ(::umask(before), 0u);
+  EXPECT_EQ(modeOf(path_), 0660u);
+  EXPECT_EQ(modeOf(folder_.file("wide")), 0666u);
+}
+
+TEST_F(ListenSocketTest, ReplacesAStaleSocketFile) {
+  boundSocket(path_).reset();
+  ASSERT_FALSE(canConnect(path_));
+  const auto result = ListenSocket::bindTo(path_);
+  EXPECT_EQ(result.error, "");
+  EXPECT_TRUE(canConnect(path_));
+}
+
+TEST_F(ListenSocketTest, RefusesThePathOfAnotherServiceOfItsKind) {
+  const auto first = ListenSocket::bindTo(path_);
+  const auto second = ListenSocket::bindTo(path_);
+  EXPECT_FALSE(second.socket);
+  EXPECT_EQ(second.error, "another service is listening on " + path_);
+  EXPECT_TRUE(canConnect(path_));
+}
+
+TEST_F(ListenSocketTest, RefusesASocketThatAnybodyListensOn) {
+  const auto live = boundSocket(path_);
+  ASSERT_EQ(::listen(live.get(), 5), 0);
+  const auto result = ListenSocket::bindTo(path_);
+  EXPECT_EQ(result.error, "another service is listening on " + path_);
+  EXPECT_TRUE(canConnect(path_));
+}
+
+TEST_F(ListenSocketTest, RefusesASocketOfAnotherKindThatIsInUse) {
+  const auto live = boundSocket(path_, SOCK_DGRAM);
+  EXPECT_EQ(ListenSocket::bindTo(path_).error, "another service is listening on " + path_);
+  EXPECT_TRUE(std::filesystem::exists(path_));
+}
+
+TEST_F(ListenSocketTest, NeverRemovesAFileThatIsNoSocket) {
+  std::ofstream(path_) << "precious";
+  EXPECT_EQ(ListenSocket::bindTo(path_).error, path_ + " exists and is not a socket");
+  EXPECT_EQ(std::filesystem::file_size(path_), 8u);
+}
+
+TEST_F(ListenSocketTest, SaysWhichPathItCanNotUse) {
+  const std::string missing = folder_.file("no/such/folder/socket");
+  EXPECT_NE(ListenSocket::bindTo(missing).error.find(missing), std::string::npos);
+  EXPECT_NE(ListenSocket::bindTo(std::string(200, 'x')).error.find("a path of 1 to 107 bytes"), std::string::npos);
+  EXPECT_NE(ListenSocket::bindTo("").error, "");
+}
+
+TEST_F(ListenSocketTest, RemovesItsFilesAtTheEnd) {
+  { const auto result = ListenSocket::bindTo(path_); }
+  EXPECT_FALSE(std::filesystem::exists(path_));
+  EXPECT_FALSE(std::filesystem::exists(path_ + ".lock"));
+}
+
+TEST_F(ListenSocketTest, LeavesAFileThatIsNoLongerItsOwn) {
+  {
+    const auto result = ListenSocket::bindTo(path_);
+    ASSERT_TRUE(std::filesystem::remove(path_));
+    std::ofstream(path_) << "another's";
+  }
+  EXPECT_TRUE(std::filesystem::exists(path_));
+}
+
+TEST_F(ListenSocketTest, ALockFileThatNobodyHoldsIsNoObstacle) {
+  std::ofstream(path_ + ".lock") << "";
+  EXPECT_EQ(ListenSocket::bindTo(path_).error, "");
+}
+
+TEST_F(ListenSocketTest, OfManyThatStartAtOnceOneWins) {
+  for (int round = 0; round < 30; ++round) {
+    boundSocket(path_).reset();
+    std::vector<ListenSocket::Result> results(6);
+    std::vector<std::thread> threads;
+    for (auto& result : results) {
+      threads.emplace_back([&result, this] { result = ListenSocket::bindTo(path_); });
+    }
+    for (auto& thread : threads) {
+      thread.join();
+    }
+    const auto winners = std::count_if(results.begin(), results.end(),
+                                       [](const auto& result) { return static_cast<bool>(result.socket); });
+    EXPECT_EQ(winners, 1);
+    EXPECT_TRUE(canConnect(path_));
+  }
+}
+
+// A child process that is started the way a service manager starts it: the first socket is descriptor 3.
+enum Outcome { kTaken = 10, kNone = 11, kRefused = 12 };
+
+int takeInChild(int descriptor, const char* count) {
+  return testing::inChild([descriptor, count] {
+    ::dup2(descriptor, 3);
+    ::setenv("LISTEN_FDS", count, 1);
+    ::setenv("LISTEN_PID", std::to_string(::getpid()).c_str(), 1);
+    const auto result = ListenSocket::takeHandedOver();
+    if (::getenv("LISTEN_FDS") != nullptr) {
+      return 1;  // a child of the service would take the socket for its own
+    }
+    if (result.socket) {
+      const bool blocks = (::fcntl(3, F_GETFL) & O_NONBLOCK) == 0;
+      const bool inherited = (::fcntl(3, F_GETFD) & FD_CLOEXEC) == 0;
+      return blocks || inherited ? 2 : static_cast<int>(kTaken);
+    }
+    return result.error.empty() ? static_cast<int>(kNone) : static_cast<int>(kRefused);
+  });
+}
+
+TEST_F(ListenSocketTest, TakesTheSocketThatWasHandedOver) {
+  const auto socket = boundSocket(path_);
+  ASSERT_EQ(::listen(socket.get(), 5), 0);
+  EXPECT_EQ(takeInChild(socket.get(), "1"), kTaken);
+}
+
+TEST_F(ListenSocketTest, LeavesTheFileOfAHandedOverSocketToItsOwner) {
+  const auto socket = boundSocket(path_);
+  ASSERT_EQ(::listen(socket.get(), 5), 0);
+  takeInChild(socket.get(), "1");
+  EXPECT_TRUE(std::filesystem::exists(path_));
+}
+
+TEST_F(ListenSocketTest, TakesNothingWhenNothingWasHandedOver) {
+  EXPECT_EQ(testing::inChild([] {
+              ::unsetenv("LISTEN_FDS");
+              const auto result = ListenSocket::takeHandedOver();
+              return !result.socket && result.error.empty() ? 0 : 1;
+            }),
+            0);
+}
+
+TEST_F(ListenSocketTest, RefusesMoreThanOneSocket) {
+  const auto socket = boundSocket(path_);
+  ASSERT_EQ(::listen(socket.get(), 5), 0);
+  EXPECT_EQ(testing::inChild([&] {
+              ::dup2(socket.get(), 3);
+              ::dup2(socket.get(), 4);
+              ::setenv("LISTEN_FDS", "2", 1);
+              ::setenv("LISTEN_PID", std::to_string(::getpid()).c_str(), 1);
+              return ListenSocket::takeHandedOver().error == "2 sockets were handed over, one is expected" ? 0 : 1;
+            }),
+            0);
+}
+
+TEST_F(ListenSocketTest, RefusesAHandedOverSocketThatDoesNotListen) {
+  EXPECT_EQ(takeInChild(boundSocket(path_).get(), "1"), kRefused);
+}
+
+TEST_F(ListenSocketTest, RefusesAHandedOverSocketOfAnotherKind) {
+  EXPECT_EQ(takeInChild(boundSocket(path_, SOCK_DGRAM).get(), "1"), kRefused);
+}
+
+}  // namespace
+}  // namespace tarn::linux_host

@@ -1,0 +1,102 @@
+#include "tests/host/socket/RecordingService.h"
+
+#include <algorithm>
+
+#include "plist/ValueView.h"
+
+namespace tarn::testing {
+
+// What is exported to one client.
+class RecordingService::Client final : public platform::TarnReportingServiceProtocol {
+ public:
+  Client(RecordingService& service, int number) : service_(service), prefix_(std::to_string(number) + " ") {}
+
+  void createReportingSession(std::int64_t reporterID, platform::Acknowledge reply) override {
+    acknowledged("createReportingSession " + std::to_string(reporterID), std::move(reply));
+  }
+  void setServiceType(std::uint16_t serviceType, std::int64_t reporterID, platform::Acknowledge reply) override {
+    acknowledged("setServiceType " + std::to_string(serviceType) + " " + std::to_string(reporterID), std::move(reply));
+  }
+  void getServiceNameForReporterID(std::int64_t reporterID, platform::Reply<std::uint16_t> reply) override {
+    work("getServiceNameForReporterID " + std::to_string(reporterID),
+         [reply = std::move(reply)]() mutable { reply(std::nullopt, std::uint16_t{65535}); });
+  }
+  void setConfiguration(plist::Dictionary configuration, std::int64_t reporterID,
+                        platform::Acknowledge reply) override {
+    acknowledged("setConfiguration " + plist::description(configuration) + " " + std::to_string(reporterID),
+                 std::move(reply));
+  }
+  void startReportingSessionForID(std::int64_t reporterID, platform::Acknowledge reply) override {
+    work("startReportingSessionForID " + std::to_string(reporterID),
+         [this, reporterID, reply = std::move(reply)]() mutable {
+           service_.heldStarts.push_back({reporterID, std::move(reply)});
+         });
+  }
+  void sendMessage(plist::Dictionary message, std::uint32_t category, std::uint16_t type,
+                   platform::ReporterIDs reporterIDs, platform::Reply<> reply) override {
+    std::string ids = reporterIDs ? "ids" : "none";
+    for (const auto id : reporterIDs.value_or(std::vector<std::int64_t>())) {
+      ids += " " + std::to_string(id);
+    }
+    const bool twice = service_.replyTwice;
+    work("sendMessage " + plist::description(message) + " " + std::to_string(category) + " " + std::to_string(type) +
+             " " + ids,
+         [twice, reply = std::move(reply)]() mutable {
+           reply(std::nullopt);
+           if (twice) {
+             reply(std::nullopt);
+           }
+         });
+  }
+  void stopReportingSessionForID(std::int64_t reporterID, platform::Acknowledge reply) override {
+    acknowledged("stopReportingSessionForID " + std::to_string(reporterID), std::move(reply));
+  }
+  void destroyReportingSession(std::int64_t reporterID, platform::Acknowledge reply) override {
+    work("destroyReportingSession " + std::to_string(reporterID), [reply = std::move(reply)]() mutable {
+      reply(platform::RemoteError{"sys.oxbow.audio.reporting", 1, "refused"}, false);
+    });
+  }
+  void reporterID(std::int64_t reporterID, platform::Reply<plist::Dictionary> reply) override {
+    const std::string padding(service_.replyPadding, 'x');
+    work("reporterID " + std::to_string(reporterID), [reporterID, padding, reply = std::move(reply)]() mutable {
+      reply(std::nullopt, plist::Dictionary{{"reporterID", reporterID}, {"padding", padding}});
+    });
+  }
+  void getAllReporters(platform::Reply<std::vector<std::int64_t>> reply) override {
+    work("getAllReporters", [reply = std::move(reply)]() mutable {
+      reply(std::nullopt, std::vector<std::int64_t>{1, -2, 3});
+    });
+  }
+  void killService() override {
+    work("killService", [] {});
+  }
+
+ private:
+  template <class Body>
+  void work(std::string event, Body body) {
+    service_.mostWaiting = std::max(service_.mostWaiting, service_.queue_->ready());
+    service_.queue_->async([this, event = std::move(event), body = std::move(body)]() mutable {
+      service_.events.push_back(prefix_ + event);
+      body();
+    });
+  }
+  void acknowledged(std::string event, platform::Acknowledge reply) {
+    work(std::move(event), [reply = std::move(reply)]() mutable { reply(std::nullopt, true); });
+  }
+
+  RecordingService& service_;
+  std::string prefix_;
+};
+
+bool RecordingService::listenerShouldAcceptNewConnection(const std::shared_ptr<platform::Connection>& connection) {
+  const int number = ++clients_;
+  processIdentifiers.push_back(connection->processIdentifier());
+  descriptions.push_back(connection->description());
+  connection->setExportedObject(std::make_shared<Client>(*this, number));
+  connection->setInterruptionHandler([this, number] { events.push_back(std::to_string(number) + " interrupted"); });
+  connection->setInvalidationHandler([this, number] { events.push_back(std::to_string(number) + " invalidated"); });
+  connection->resume();
+  return true;
+}
+
+}  // namespace tarn::testing

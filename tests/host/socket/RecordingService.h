@@ -1,0 +1,48 @@
+// RecordingService: stands in for the service behind the listener. Notes each request, answers it on the server queue,
+// and can misbehave on demand. It lives in the test process; its fields are touched on the loop's thread, so tests look
+// at them through RunningLoop::onQueue.
+#pragma once
+
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "host/loop/ServerQueue.h"
+#include "platform/Listener.h"
+#include "platform/TarnReportingServiceProtocol.h"
+
+namespace tarn::testing {
+
+class RecordingService final : public platform::ListenerDelegate,
+                               public std::enable_shared_from_this<RecordingService> {
+ public:
+  explicit RecordingService(std::shared_ptr<linux_host::ServerQueue> queue) : queue_(std::move(queue)) {}
+  RecordingService(const RecordingService&) = delete;
+  RecordingService& operator=(const RecordingService&) = delete;
+
+  // The interface. Clients are numbered from 1 in the order in which they were accepted.
+  bool listenerShouldAcceptNewConnection(const std::shared_ptr<platform::Connection>& connection) override;
+
+  // Controls.
+  bool replyTwice = false;       // every message is answered twice
+  std::size_t replyPadding = 0;  // bytes of the dictionary that reporterID answers
+
+  // Observations.
+  struct Held {
+    std::int64_t reporterID;
+    platform::Acknowledge reply;
+  };
+  std::vector<std::string> events;  // "1 createReportingSession 7", "1 interrupted", "1 invalidated"
+  std::vector<Held> heldStarts;     // the reply of every start
+  std::vector<std::int32_t> processIdentifiers;
+  std::vector<std::string> descriptions;
+  std::size_t mostWaiting = 0;  // pieces of work that waited when a request came
+
+ private:
+  class Client;
+
+  std::shared_ptr<linux_host::ServerQueue> queue_;
+  int clients_ = 0;
+};
+
+}  // namespace tarn::testing

@@ -1,0 +1,68 @@
+#include "plist/formats/Json.h"
+
+#include <gtest/gtest.h>
+
+#include <cmath>
+
+#include "plist/Dictionary.h"
+
+namespace tarn::plist {
+namespace {
+
+std::string json(const ValueView& value) {
+  std::string out;
+  appendJson(out, value);
+  return out;
+}
+
+TEST(Json, NumbersKeepTheirKind) {
+  EXPECT_EQ(json(Array{true, false, 1, -2, UINT64_MAX, 1.0, 2.5F, 1e20}),
+            "[true,false,1,-2,18446744073709551615,1.0,2.5,1e+20]");
+}
+
+TEST(Json, NotFiniteNumbersAreTexts) {
+  EXPECT_EQ(json(Array{std::nan(""), HUGE_VAL, -HUGE_VALF}), R"(["nan","inf","-inf"])");
+}
+
+TEST(Json, DatesAreIsoTextsWithTheDecimalsTheyHave) {
+  EXPECT_EQ(json(Date{1795168800.0}), R"("2026-11-20T10:00:00Z")");
+  EXPECT_EQ(json(Date{1795168800.25}), R"("2026-11-20T10:00:00.25Z")");
+  EXPECT_EQ(json(Date{-62135596800.0}), R"("0001-01-01T00:00:00Z")");
+  EXPECT_EQ(json(Date{253402300799.0}), R"("9999-12-31T23:59:59Z")");
+}
+
+TEST(Json, DatesOutsideTheCalendarAreSeconds) {
+  EXPECT_EQ(json(Date{253402300800.0}), "253402300800.0");
+  EXPECT_EQ(json(Date{-62135596801.0}), "-62135596801.0");
+  EXPECT_EQ(json(Date{HUGE_VAL}), R"("inf")");
+}
+
+TEST(Json, DataIsBase64) {
+  EXPECT_EQ(json(DataView{""}), R"("")");
+  EXPECT_EQ(json(DataView{"f"}), R"("Zg==")");
+  EXPECT_EQ(json(DataView{"fo"}), R"("Zm8=")");
+  EXPECT_EQ(json(DataView{"foo"}), R"("Zm9v")");
+  EXPECT_EQ(json(DataView{"foob"}), R"("Zm9vYg==")");
+  EXPECT_EQ(json(DataView{"\xff\xfe\xfd"}), R"("//79")");
+}
+
+TEST(Json, TextsAreEscaped) {
+  EXPECT_EQ(json("a\"b\\c\n\x01\x7f\xc3\xa9/"), "\"a\\\"b\\\\c\\n\\u0001\x7f\xc3\xa9/\"");
+}
+
+TEST(Json, ContainersKeepTheirOrder) {
+  EXPECT_EQ(json(Dictionary{{"b", Array{}}, {"a", Dictionary{{"x", "y"}}}}), R"({"b":[],"a":{"x":"y"}})");
+}
+
+TEST(Json, Base64IsDecodedStrictly) {
+  EXPECT_EQ(decodeBase64(""), "");
+  EXPECT_EQ(decodeBase64("YQ=="), "a");
+  EXPECT_EQ(decodeBase64("YWI="), "ab");
+  EXPECT_EQ(decodeBase64("YWJj"), "abc");
+  for (const char* wrong : {"YQ", "YQ=", "YR==", "Y===", "====", "YQ==YQ==", "Y Q=", "YWJ\n"}) {
+    EXPECT_FALSE(decodeBase64(wrong)) << wrong;
+  }
+}
+
+}  // namespace
+}  // namespace tarn::plist

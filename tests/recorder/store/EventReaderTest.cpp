@@ -1,0 +1,243 @@
+#include "recorder/store/EventReader.h"
+
+#include <sys/stat.h>
+
+#include "tests/recorder/ChildProcess.h"
+#include "tests/recorder/RecorderFixture.h"
+
+namespace tarn::recorder {
+namespace {
+
+using Status = EventReader::Status;
+
+class EventReaderTest : public RecorderFixture {
+ protected:
+  static std::vector<std::string> names(const EventReader::Result& result) {
+    std::vector<std::string> all;
+    for (const EventRow& row : result.rows) all.push_back(row.name);
+    return all;
+  }
+  void recordAs(std::string_view backend, const std::string& name) {
+    recorder_->record(backend, name, {}, {}, clock_.epochSeconds());
+  }
+};
+
+using Names = std::vector<std::string>;
+
+TEST_F(EventReaderTest, RowsCarryEveryColumn) {
+  start();
+  recorder_->record("wattlog", "audio", {{"a", 1}}, {{"agent", 28}}, 1750000000.5);
+  ASSERT_TRUE(flush());
+  EventReader reader(file());
+  const EventReader::Result result = reader.read({});
+  ASSERT_EQ(result.status, Status::Ok) << result.error;
+  ASSERT_EQ(result.rows.size(), 1U);
+  const EventRow& row = result.rows.front();
+  EXPECT_EQ(row.id, 1);
+  EXPECT_EQ(row.time, 1750000000.5);
+  EXPECT_EQ(row.backend, "wattlog");
+  EXPECT_EQ(row.name, "audio");
+  EXPECT_EQ(row.payload, R"({"a":1})");
+  EXPECT_EQ(row.detail, R"({"agent":28})");
+}
+
+TEST_F(EventReaderTest, QueriesByBackendNameAndId) {
+  start();
+  recordAs("tally", "x.one");
+  recordAs("wattlog", "x.two");
+  recordAs("tally", "y.three");
+  recordAs("tally", "x.four");
+  ASSERT_TRUE(flush());
+  EventReader reader(file());
+  EventQuery query;
+  query.backend = "tally";
+  EXPECT_EQ(names(reader.read(query)), (Names{"x.one", "y.three", "x.four"}));
+  query.nameGlob = "x.*";
+  EXPECT_EQ(names(reader.read(query)), (Names{"x.one", "x.four"}));
+  query.after = 1;
+  EXPECT_EQ(names(reader.read(query)), Names{"x.four"});
+}
+
+TEST_F(EventReaderTest, LimitCutsAndTheNextQueryGoesOn) {
+  start();
+  recordMany(5);
+  ASSERT_TRUE(flush());
+  EventReader reader(file());
+  EventQuery query;
+  query.limit = 3;
+  const EventReader::Result first = reader.read(query);
+  EXPECT_EQ(names(first), (Names{"event0", "event1", "event2"}));
+  EXPECT_TRUE(first.more);
+  query.after = first.lookedUpTo;
+  const EventReader::Result second = reader.read(query);
+  EXPECT_EQ(names(second), (Names{"event3", "event4"}));
+  EXPECT_FALSE(second.more);
+}
+
+TEST_F(EventReaderTest, EventsThatDoNotMatchAreNotLookedAtAgain) {
+  start();
+  recordMany(5);
+  ASSERT_TRUE(flush());
+  EventReader reader(file());
+  EventQuery query;
+  query.nameGlob = "none*";
+  EXPECT_EQ(reader.read(query).lookedUpTo, 5);
+}
+
+TEST_F(EventReaderTest, AMissingFileIsToldAndIsReadOnceItIsThere) {
+  EventReader reader(file());
+  EXPECT_EQ(reader.read({}).status, Status::Missing);
+  EXPECT_FALSE(reader.waitForChange(std::chrono::milliseconds(1)));
+  start();
+  record("a");
+  ASSERT_TRUE(flush());
+  EXPECT_TRUE(reader.waitForChange(kPatience));
+  EXPECT_EQ(names(reader.read({})), Names{"a"});
+}
+
+TEST_F(EventReaderTest, AnEmptyFileHoldsNoEventsYet) {
+  std::ofstream(file()).flush();
+  EventReader reader(file());
+  EXPECT_EQ(reader.read({}).status, Status::Missing);
+}
+
+TEST_F(EventReaderTest, AFileThatIsNoDatabaseIsAFailure) {
+  std::ofstream(file()) << std::string(10'000, 'g');
+  EventReader reader(file());
+  const EventReader::Result result = reader.read({});
+  EXPECT_EQ(result.status, Status::Failed);
+  EXPECT_NE(result.error.find("not a database"), std::string::npos) << result.error;
+}
+
+TEST_F(EventReaderTest, WaitsUntilSomethingIsWritten) {
+  start();
+  record("a");
+  ASSERT_TRUE(flush());
+  EventReader reader(file());
+  EventQuery query;
+  query.after = reader.read(query).lookedUpTo;
+  EXPECT_FALSE(reader.waitForChange(std::chrono::milliseconds(30)));
+  record("b");
+  EXPECT_TRUE(reader.waitForChange(kPatience));
+  EXPECT_EQ(names(reader.read(query)), Names{"b"});
+}
+
+TEST_F(EventReaderTest, FollowsAcrossARunOfTheService) {
+  start();
+  record("a");
+  stop();
+  EventReader reader(file());
+  EventQuery query;
+  query.after = reader.read(query).lookedUpTo;
+  start();
+  record("b");
+  ASSERT_TRUE(flush());
+  EXPECT_TRUE(reader.waitForChange(kPatience));
+  EXPECT_EQ(names(reader.read(query)), Names{"b"});
+}
+
+TEST_F(EventReaderTest, FollowsIntoAFileWhoseIdsGoOn) {
+  start();
+  recordMany(5);
+  ASSERT_TRUE(flush());
+  EventReader reader(file());
+  EventQuery query;
+  query.after = reader.read(query).lookedUpTo;
+  std::filesystem::rename(file(), directory_.path() / "elsewhere");
+  record("after");
+  ASSERT_TRUE(flush());
+  EXPECT_TRUE(reader.waitForChange(kPatience));
+  const EventReader::Result result = reader.read(query);
+  EXPECT_EQ(names(result), Names{"after"});
+  EXPECT_EQ(result.lookedUpTo, 6);
+}
+
+TEST_F(EventReaderTest, FollowsIntoAFileWhoseIdsBeginAnew) {
+  start();
+  recordMany(5);
+  ASSERT_TRUE(flush());
+  EventReader reader(file());
+  EventQuery query;
+  query.after = reader.read(query).lookedUpTo;
+  ASSERT_EQ(query.after, 5);
+  stop();
+  for (const char* const suffix : {"", "-wal", "-shm"}) std::filesystem::remove(file().string() + suffix);
+  EXPECT_EQ(reader.read(query).status, Status::Missing);
+  start();
+  record("anew");
+  ASSERT_TRUE(flush());
+  const EventReader::Result result = reader.read(query);
+  EXPECT_EQ(names(result), Names{"anew"});
+  EXPECT_EQ(result.lookedUpTo, 1);
+}
+
+TEST_F(EventReaderTest, AFailureInBetweenRepeatsNothing) {
+  start();
+  recordMany(5);
+  stop();
+  EventReader reader(file());
+  EventQuery query;
+  query.after = reader.read(query).lookedUpTo;
+  change(file(), "ALTER TABLE events RENAME COLUMN name TO other");
+  EXPECT_EQ(reader.read(query).status, Status::Failed);
+  change(file(), "ALTER TABLE events RENAME COLUMN other TO name");
+  const EventReader::Result result = reader.read(query);
+  EXPECT_EQ(result.status, Status::Ok) << result.error;
+  EXPECT_EQ(names(result), Names{});
+}
+
+TEST_F(EventReaderTest, ReadsADirectoryThatItMayNotWriteTo) {
+  ChildProcess child([this] {
+    becomeOrdinaryUser(directory_.path());
+    start();
+    record("a");
+    stop();
+    ASSERT_EQ(::chmod(directory_.path().c_str(), 0555), 0);
+    EventReader reader(file());
+    const EventReader::Result result = reader.read({});
+    EXPECT_EQ(result.status, Status::Ok) << result.error;
+    EXPECT_EQ(names(result), Names{"a"});
+    EXPECT_FALSE(reader.waitForChange(std::chrono::milliseconds(30)));
+    ASSERT_EQ(::chmod(directory_.path().c_str(), 0755), 0);
+  });
+  EXPECT_EQ(child.wait(), 0);
+}
+
+TEST_F(EventReaderTest, FollowsFromADirectoryThatItMayNotWriteToWhenTheServiceStarts) {
+  ChildProcess child([this] {
+    becomeOrdinaryUser(directory_.path());
+    start();
+    record("a");
+    stop();
+    ASSERT_EQ(::chmod(directory_.path().c_str(), 0555), 0);
+    EventReader reader(file());
+    EventQuery query;
+    query.after = reader.read(query).lookedUpTo;
+    ASSERT_EQ(::chmod(directory_.path().c_str(), 0755), 0);
+    start();
+    record("b");
+    ASSERT_TRUE(flush());
+    EXPECT_TRUE(reader.waitForChange(kPatience));
+    EXPECT_EQ(names(reader.read(query)), Names{"b"});
+    stop();
+  });
+  EXPECT_EQ(child.wait(), 0);
+}
+
+TEST_F(EventReaderTest, PathsWithSpecialCharactersAreReadFromADirectoryThatItMayNotWriteTo) {
+  ChildProcess child([this] {
+    becomeOrdinaryUser(directory_.path());
+    options_.file = directory_.path() / "odd ?name#100%.sqlite3";
+    start();
+    record("a");
+    stop();
+    ASSERT_EQ(::chmod(directory_.path().c_str(), 0555), 0);
+    EventReader reader(file());
+    EXPECT_EQ(names(reader.read({})), Names{"a"});
+    ASSERT_EQ(::chmod(directory_.path().c_str(), 0755), 0);
+  });
+  EXPECT_EQ(child.wait(), 0);
+}
+
+}  // namespace
+}  // namespace tarn::recorder
