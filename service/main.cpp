@@ -140,7 +140,7 @@ class Host final : public platform::ProcessControl {
         workQueues_(clock, loop_.queue()),
         tattle_(recorder_, clock, workQueues_),
         gyre_(recorder_, clock),
-        conditions_(clock, loop_.queue(), loop_.progress()),
+        conditions_(loop_),
         defaults_(setup.options.stateDirectory + "/defaults", log),
         notifications_(setup.options.stateDirectory + "/notifications", log),
         fileSystem_(directoriesOf(setup)),

@@ -1,5 +1,7 @@
 #include "host/loop/LinuxConditions.h"
 
+#include <algorithm>
+#include <atomic>
 #include <condition_variable>
 #include <mutex>
 
@@ -22,44 +24,54 @@ std::chrono::nanoseconds held(Seconds timeout) {
 
 class LinuxCondition final : public platform::Condition {
  public:
-  LinuxCondition(const platform::Clock& clock, std::shared_ptr<platform::WorkQueue> serverQueue,
-                 QueueProgress& progress)
-      : clock_(clock), serverQueue_(std::move(serverQueue)), progress_(progress) {}
+  explicit LinuxCondition(MainLoop& loop) : loop_(loop), serverQueue_(loop.queue()) {}
 
   void lock() override { mutex_.lock(); }
   void unlock() override { mutex_.unlock(); }
-  void signal() override { condition_.notify_one(); }
+
+  void signal() override {
+    ++signals_;
+    condition_.notify_one();
+    serverQueue_->wake();
+  }
 
   bool waitFor(Seconds timeout) override {
-    const bool watched = serverQueue_->isCurrent();
-    if (watched) {
-      progress_.beginWait(clock_.monotonic());
-    }
     std::unique_lock lock(mutex_, std::adopt_lock);
-    const bool signalled = condition_.wait_for(lock, held(timeout)) == std::cv_status::no_timeout;
+    const bool signalled = serverQueue_->isCurrent()
+                               ? waitOnServerQueue(lock, held(timeout))
+                               : condition_.wait_for(lock, held(timeout)) == std::cv_status::no_timeout;
     lock.release();
-    if (watched) {
-      progress_.endWait();
-    }
     return signalled;
   }
 
  private:
-  const platform::Clock& clock_;
-  std::shared_ptr<platform::WorkQueue> serverQueue_;
-  QueueProgress& progress_;
+  bool waitOnServerQueue(std::unique_lock<std::mutex>& lock, std::chrono::nanoseconds timeout) {
+    const platform::Clock& clock = loop_.clock();
+    const auto begin = clock.monotonic();
+    const auto deadline = begin + timeout;
+    const auto isSignalled = [this, before = signals_.load()] { return signals_ != before; };
+    loop_.progress().beginWait(begin);
+    lock.unlock();
+    loop_.waitUntil(deadline, isSignalled);
+    lock.lock();
+    // What is left when the loop serves no more.
+    const auto left = std::max(deadline - clock.monotonic(), std::chrono::nanoseconds::zero());
+    const bool signalled = condition_.wait_for(lock, left, isSignalled);
+    loop_.progress().endWait();
+    return signalled;
+  }
+
+  MainLoop& loop_;
+  const std::shared_ptr<ServerQueue> serverQueue_;  // a back-end may signal after the loop's end
   std::mutex mutex_;
   std::condition_variable condition_;
+  std::atomic<std::uint64_t> signals_{0};
 };
 
 }  // namespace
 
-LinuxConditions::LinuxConditions(const platform::Clock& clock, std::shared_ptr<platform::WorkQueue> serverQueue,
-                                 QueueProgress& progress)
-    : clock_(clock), serverQueue_(std::move(serverQueue)), progress_(progress) {}
-
 std::shared_ptr<platform::Condition> LinuxConditions::makeCondition() {
-  return std::make_shared<LinuxCondition>(clock_, serverQueue_, progress_);
+  return std::make_shared<LinuxCondition>(loop_);
 }
 
 }  // namespace tarn::linux_host

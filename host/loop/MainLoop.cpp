@@ -1,9 +1,9 @@
 #include "host/loop/MainLoop.h"
 
-#include <sys/epoll.h>
-
+#include <algorithm>
 #include <array>
 #include <cerrno>
+#include <utility>
 
 #include "host/log/HostLog.h"
 
@@ -13,7 +13,6 @@ namespace {
 
 // Pieces of work that run before the sockets are looked at again.
 constexpr std::size_t kPiecesPerTurn = 1024;
-constexpr int kEventsPerTurn = 128;
 
 std::uint64_t tokenOf(int descriptor, std::uint32_t generation) {
   return (std::uint64_t{generation} << 32) | static_cast<std::uint32_t>(descriptor);
@@ -97,15 +96,43 @@ void MainLoop::flushAll() {
 }
 
 void MainLoop::waitForEvents() {
-  std::array<epoll_event, kEventsPerTurn> events;
   const auto timeout = flushes_.empty() ? queue_->prepareToSleep() : std::chrono::nanoseconds::zero();
+  Events events;
   progress_.setIdle(true);
-  const int count = ::epoll_wait(epoll_.get(), events.data(), kEventsPerTurn, milliseconds(timeout));
+  const std::size_t count = sleep(events, timeout);
   progress_.setIdle(false);
   progress_.step();
+  dispatchAll({events.data(), count});
+}
+
+void MainLoop::waitUntil(std::chrono::nanoseconds deadline, platform::UniqueFunction<bool()> isOver) {
+  if (std::exchange(waits_, true)) {
+    return;
+  }
+  while (!isOver() && !stopping_.load(std::memory_order_relaxed)) {
+    flushAll();
+    const auto left = deadline - clock_.monotonic();
+    if (left <= std::chrono::nanoseconds::zero()) {
+      break;
+    }
+    if (queue_->prepareToWait()) {
+      Events events;
+      const std::size_t count = sleep(events, left);
+      dispatchAll({events.data(), count});
+    }
+  }
+  waits_ = false;
+}
+
+// Waits for events as it was announced to the queue; how many there are.
+std::size_t MainLoop::sleep(Events& events, std::optional<std::chrono::nanoseconds> timeout) {
+  const int count = ::epoll_wait(epoll_.get(), events.data(), kEventsPerTurn, milliseconds(timeout));
   queue_->awake();
-  for (int i = 0; i < count; ++i) {
-    const epoll_event& event = events[static_cast<std::size_t>(i)];
+  return static_cast<std::size_t>(std::max(count, 0));
+}
+
+void MainLoop::dispatchAll(std::span<const epoll_event> events) {
+  for (const epoll_event& event : events) {
     dispatch(event.data.u64, event.events);
   }
 }

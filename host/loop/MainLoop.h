@@ -5,15 +5,21 @@
 //
 // A round trip of a lone client is therefore three system calls: epoll_wait, recv, send. Work and sockets take turns,
 // so neither starves the other; a piece of work that blocks holds up the sockets, which slows clients and loses
-// nothing.
+// nothing. A piece that waits on purpose serves them meanwhile, with waitUntil().
 //
 // Owned by the entry point; outlives what it watches. Threads: stop() and the queue any; the rest only the loop's
 // thread (or before run()).
 #pragma once
 
+#include <sys/epoll.h>
+
+#include <array>
 #include <atomic>
+#include <chrono>
 #include <cstdint>
 #include <memory>
+#include <optional>
+#include <span>
 #include <string>
 #include <vector>
 
@@ -68,13 +74,25 @@ class MainLoop {
   void run();
   void stop();
 
+  // For a piece of work that waits on purpose: until `isOver` or the deadline, handlers are called and flushes made as
+  // ever, but no work is run. It ends early once the loop was stopped, and does nothing inside itself. `isOver` is
+  // asked anew after each event and each wake() of the queue.
+  void waitUntil(std::chrono::nanoseconds deadline, platform::UniqueFunction<bool()> isOver);
+  // Whether the queue's work waits in waitUntil().
+  bool waits() const noexcept { return waits_; }
+
  private:
   struct Slot {
     std::shared_ptr<EventHandler> handler;
     std::uint32_t generation = 0;  // tells a watched descriptor from an earlier one of the same number
   };
 
+  static constexpr int kEventsPerTurn = 128;
+  using Events = std::array<epoll_event, kEventsPerTurn>;
+
   void waitForEvents();
+  std::size_t sleep(Events& events, std::optional<std::chrono::nanoseconds> timeout);
+  void dispatchAll(std::span<const epoll_event> events);
   void dispatch(std::uint64_t token, std::uint32_t events);
 
   const platform::Clock& clock_;
@@ -83,6 +101,7 @@ class MainLoop {
   UniqueDescriptor epoll_;
   std::string startError_;
   std::atomic<bool> stopping_{false};
+  bool waits_ = false;
 
   std::vector<Slot> slots_;  // by descriptor
   std::vector<std::shared_ptr<EventHandler>> flushes_;

@@ -124,6 +124,16 @@ std::optional<std::chrono::nanoseconds> ServerQueue::prepareToSleep() {
   return timeout;
 }
 
+bool ServerQueue::prepareToWait() {
+  const std::lock_guard lock(mutex_);
+  if (std::exchange(lookAround_, false)) {
+    return false;
+  }
+  sleepsUntil_ = {};  // what is delayed stays so
+  sleeping_ = true;
+  return true;
+}
+
 void ServerQueue::awake() {
   const std::lock_guard lock(mutex_);
   sleeping_ = false;

@@ -50,6 +50,9 @@ class ServerQueue final : public platform::WorkQueue {
   // awake() is called. Zero when there is work: then nothing was announced.
   std::optional<std::chrono::nanoseconds> prepareToSleep();
   void awake();
+  // Announces a sleep in the middle of a piece of work, which the waiting work doesn't prevent; ended with awake().
+  // False when wake() was called since the last look around: then nothing was announced.
+  bool prepareToWait();
   // Becomes readable when a sleeping server must wake; drained with drainWake(). Negative when the system had none
   // left.
   int wakeDescriptor() const noexcept { return wake_.get(); }

@@ -20,7 +20,7 @@ class ConnectionHost {
 
   // Loop and log outlive the host, and the loop runs no more when the host ends.
   ConnectionHost(MainLoop& mainLoop, platform::Log& logSink, const HostLimits& hostLimits = {})
-      : loop(mainLoop), log(logSink), limits(hostLimits), gate(mainLoop.queue(), hostLimits.maxQueuedWork) {
+      : loop(mainLoop), log(logSink), limits(hostLimits), gate(mainLoop, hostLimits.maxQueuedWork) {
     loop.addTurnHook([this] { gate.releaseHeld(); });
   }
   ConnectionHost(const ConnectionHost&) = delete;

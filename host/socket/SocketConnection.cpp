@@ -138,9 +138,8 @@ void SocketConnection::serveFrame(std::span<const std::byte> frame) {
 
 void SocketConnection::serveRequest(wire::DecodedRequest& request) {
   if (request.operation == wire::Operation::Status) {
-    // Behind the work of the requests before it, whose outcome it tells.
-    host_.loop.queue()->async(
-        [self = shared_from_this(), id = request.id] { self->sendReply(id, {self->host_.status()}); });
+    // At once: whoever asks how the service is must not wait for its work.
+    sendReply(request.id, {host_.status()});
   } else if (!host_.gate.open()) {
     heldRequest_ = std::move(request);
     host_.gate.hold(shared_from_this());

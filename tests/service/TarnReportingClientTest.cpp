@@ -164,6 +164,7 @@ TEST_F(RemoteOperations, SessionUnderIDZeroIsConfiguredAndNeverTypedStartedOrTol
   EXPECT_FALSE(sessionOf(0, 0)->started());
   send(client_, {{"a", 1}}, std::vector<std::int64_t>{0});
   EXPECT_EQ(sessionOf(0, 0)->totalMessageCount(), 0);
+  EXPECT_EQ(service_->findReportingSessionForID(0), nullptr);
   sessionOf(0, 0)->setServiceType(AudioServiceType::Alarms);
   EXPECT_EQ(serviceType(client_, 0), 65535);
   sessionOf(0, 0)->start();

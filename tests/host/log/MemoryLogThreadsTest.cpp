@@ -97,7 +97,7 @@ class MemoryLogThreads : public ::testing::Test {
   testing::ScratchFolder folder_;
   testing::RunningLoop running_;
   StandInRunner runner_;
-  LinuxConditions conditions_{running_.clock, running_.loop.queue(), running_.loop.progress()};
+  LinuxConditions conditions_{running_.loop};
   std::vector<std::shared_ptr<TarnReportingSession>> sessions_;  // the server queue's
 
  private:

@@ -16,7 +16,7 @@ using namespace std::chrono_literals;
 class LinuxConditionsTest : public ::testing::Test {
  protected:
   testing::RunningLoop running_;
-  LinuxConditions conditions_{running_.clock, running_.loop.queue(), running_.loop.progress()};
+  LinuxConditions conditions_{running_.loop};
 };
 
 TEST_F(LinuxConditionsTest, AWaitWithoutASignalEndsWhenTheTimeIsUp) {

@@ -196,5 +196,28 @@ TEST_F(ServerQueueTest, AWakeThatComesJustBeforeTheSleepIsNotLost) {
   EXPECT_EQ(queue_.prepareToSleep(), std::nullopt);
 }
 
+TEST_F(ServerQueueTest, AWaitInTheMiddleOfWorkIsEndedByWorkAndByAWakeButNotByDelayedWork) {
+  queue_.async(note('a'));
+  ASSERT_TRUE(queue_.prepareToWait());  // although work waits
+  queue_.asyncAfter(1ns, note('b'));
+  EXPECT_FALSE(wakeWritten());
+  queue_.async(note('c'));
+  EXPECT_TRUE(wakeWritten());
+  queue_.drainWake();
+  queue_.awake();
+  ASSERT_TRUE(queue_.prepareToWait());
+  queue_.wake();
+  EXPECT_TRUE(wakeWritten());
+}
+
+TEST_F(ServerQueueTest, AWakeBeforeTheWaitIsNotLost) {
+  queue_.wake();
+  EXPECT_FALSE(queue_.prepareToWait());
+  EXPECT_TRUE(queue_.prepareToWait());
+  queue_.awake();
+  queue_.async(note('a'));
+  EXPECT_FALSE(wakeWritten());  // nobody sleeps
+}
+
 }  // namespace
 }  // namespace tarn::linux_host
