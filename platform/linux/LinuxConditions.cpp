@@ -62,4 +62,12 @@ std::shared_ptr<platform::Condition> LinuxConditions::makeCondition() {
   return std::make_shared<LinuxCondition>(clock_, serverQueue_, progress_);
 }
 
+std::shared_ptr<void> LinuxConditions::blockOnPurpose() {
+  if (!serverQueue_->isCurrent()) {
+    return nullptr;
+  }
+  progress_.beginWait(clock_.monotonic());
+  return {&progress_, [](QueueProgress* progress) { progress->endWait(); }};
+}
+
 }  // namespace tarn::linux_host

@@ -1,4 +1,5 @@
-// LinuxConditions: condition variables. A wait on the server queue is told to the watchdog as a deliberate one.
+// LinuxConditions: condition variables. A wait on the server queue, and work that blocks it on purpose, is told to the
+// watchdog.
 //
 // Owned by the entry point; outlives the conditions that it made. Threads: any.
 #pragma once
@@ -18,6 +19,7 @@ class LinuxConditions final : public platform::Conditions {
   LinuxConditions& operator=(const LinuxConditions&) = delete;
 
   std::shared_ptr<platform::Condition> makeCondition() override;
+  std::shared_ptr<void> blockOnPurpose() override;
 
  private:
   const platform::Clock& clock_;
