@@ -34,11 +34,13 @@ class TarnReportingRegistrationPublication : public std::enable_shared_from_this
   void begin(const TarnReportingSession& session, const std::string& hierarchyToken);
   // Whether backends were found.
   bool started() const noexcept { return started_; }
+  // Sends one message as it is. One that is refused with an error is logged; one that is sent puts the next publication
+  // off by a week. Behind begin(); without a back-end session nothing is sent.
+  void _sendMessage(
+      const TarnReportingSessionMessage& message);  // NOLINT(readability-identifier-naming): its given name
 
  private:
   void sendRecords();
-  // One that is refused with an error is logged. One that is sent puts the next publication off by a week.
-  void sendMessage(const TarnReportingSessionMessage& message);
 
   const std::shared_ptr<TarnReportingRegistrationState> state_;
   const std::vector<plist::Dictionary> records_;
