@@ -256,7 +256,7 @@ TEST_F(RtcFaults, StopHelpsAStartThatNoThreadHasComeTo) {
     session->sendMessage(message({{"n", period}}));
     EXPECT_EQ(platform_.rtcReporting.sessions().size(), static_cast<std::size_t>(period));
     session->stop();
-    EXPECT_EQ(platform_.rtcReporting.sessions().size(), static_cast<std::size_t>(period) + 1);
+    ASSERT_EQ(platform_.rtcReporting.sessions().size(), static_cast<std::size_t>(period) + 1);
     EXPECT_FALSE(workerOf(*session).started());
     EXPECT_EQ(platform_.rtcReporting.sessions().back().flushes, 0U);  // the stop itself is for the queue
   }
