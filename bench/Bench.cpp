@@ -33,6 +33,7 @@ constexpr Figure kFigures[] = {
     {"stop", &measureStop},
     {"mirror", &measureMirror},
     {"diagnostics", &measureDiagnostics},
+    {"trace", &measureTrace},
 };
 
 std::string besideThisProgram(const std::string& name) {

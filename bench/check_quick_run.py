@@ -49,6 +49,7 @@ ROWS = [
     ("mirror, stop until its summary event is sent", ("",)),
     ("threads of the service, 1000 live sessions", ("",)),
     ("resident bytes a live session", ("",)),
+    ("evaluation of a trace, processor time", ("by the clock",)),
 ]
 for kind in ("ordinary", "merging pairs", "ending segments", "ordinary, summary file"):
     ROWS.append((f"stop of 10^3 messages, {kind}, a message", ("in all",)))

@@ -25,6 +25,9 @@ class Conditions {
  public:
   virtual ~Conditions() = default;
   virtual std::shared_ptr<Condition> makeCondition() = 0;
+  // Work that blocks the server queue on purpose, like a wait: until what is returned is let go of, on the same thread.
+  // Nothing waits within it.
+  [[nodiscard]] virtual std::shared_ptr<void> blockOnPurpose() = 0;
 };
 
 }  // namespace tarn::platform

@@ -38,6 +38,8 @@ class PerformanceTraceSession {
   virtual void stopTrace() = 0;
   // Whether there is a trace that can be stopped.
   virtual bool isValid() const = 0;
+  // Events that the finished trace lacks, since there was no room for them. Known from the completion on.
+  virtual std::uint64_t eventsLeftOut() const = 0;
 };
 
 class PerformanceTraceService {

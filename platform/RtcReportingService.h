@@ -1,7 +1,7 @@
 // RtcReportingService: the service that gathers telemetry sessions of real-time communication from many processes.
 //
-// Threads: the calls of one session come one at a time, from any thread; the start's completion comes on a thread of
-// the service's own, at any time, also when whoever asked is gone.
+// Threads: the calls of one session come one at a time, from any thread; the start's completion comes within the
+// call or on a thread of the service's own, at any time, also when whoever asked is gone.
 #pragma once
 
 #include <cstdint>

@@ -8,6 +8,7 @@
 #include <cstddef>
 #include <memory>
 #include <string_view>
+#include <utility>
 
 #include "platform/UniqueFunction.h"
 
@@ -34,6 +35,13 @@ class WorkQueue {
 //   the queue:   [nothing runs .........................]  next  what was handed over meanwhile, in its order
 class SuspendableQueue : public WorkQueue {
  public:
+  // Like async(), for work that somebody waits for: where many pieces are gathered before a thread is woken for them,
+  // one is woken for this piece.
+  virtual void asyncAtOnce(Work work) { async(std::move(work)); }
+  // Runs what waits, in its order and at most a handful of pieces, on the caller's thread and still as work of this
+  // queue. While another thread runs work of it the call waits for that, at most so long. Nothing happens while it is
+  // suspended.
+  virtual void help(std::chrono::nanoseconds longest) { static_cast<void>(longest); }
   // For work of this queue, once and as the last thing it does: nothing more of the queue begins until resume() is
   // called or `longest` has passed. Then `next` runs, ahead of all that waits.
   virtual void suspend(std::chrono::nanoseconds longest, Work next) = 0;

@@ -24,7 +24,8 @@ const plist::Key kType("type");
 
 }  // namespace
 
-// The completions that are still to come. All are equally late, so they come in the order of the starts.
+// The completions of starts. All are equally late, so they come in the order of the starts; without a delay they come
+// within the call.
 class RecorderRtcReportingService::Completions {
  public:
   using Completion = platform::RtcReportingSession::StartCompletion;
@@ -36,6 +37,10 @@ class RecorderRtcReportingService::Completions {
   ~Completions() { stop(); }
 
   void add(Completion completion) {
+    if (delay_ == std::chrono::milliseconds::zero()) {
+      completion(backends_);
+      return;
+    }
     const std::lock_guard lock(mutex_);
     if (stopping_) return;
     if (!thread_.joinable()) thread_ = std::thread([this] { run(); });

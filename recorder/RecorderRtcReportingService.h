@@ -3,7 +3,8 @@
 // 1 in each run.
 //
 // How it answers is told by the configuration: which backends a start finds, how late it says so, and whether it hands
-// out tokens at all. Completions come on a thread of its own, each at its moment, so a late one holds up no other.
+// out tokens at all. Without a delay a completion comes within the call of the start. Late ones come on a thread of
+// their own, each at its moment, so one holds up no other.
 //
 // Owner: the entry point; sessions may outlive it, but not the recorder. Threads: any.
 #pragma once

@@ -52,6 +52,12 @@ void ManualConditions::recordOrderIn(OrderRecord& record) {
   script_->recordOrderIn(record);
 }
 
+std::shared_ptr<void> ManualConditions::blockOnPurpose() {
+  auto block = std::make_shared<std::size_t>(++blocks_);
+  block_ = block;
+  return block;
+}
+
 void ManualConditions::onWait(WaitHook hook) {
   const std::lock_guard lock(script_->mutex);
   script_->hook = std::move(hook);

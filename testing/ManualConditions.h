@@ -58,6 +58,7 @@ class ManualConditions final : public platform::Conditions {
 
   // The interface.
   std::shared_ptr<platform::Condition> makeCondition() override;
+  std::shared_ptr<void> blockOnPurpose() override;
 
   // Controls.
   void recordOrderIn(OrderRecord& record);
@@ -67,12 +68,17 @@ class ManualConditions final : public platform::Conditions {
   // Observations.
   // The time-outs asked for, in the order of the waits.
   std::vector<std::chrono::duration<double>> timeouts() const;
+  // Whether somebody blocks the queue on purpose, and how often somebody did.
+  bool isBlockedOnPurpose() const noexcept { return !block_.expired(); }
+  std::size_t blocks() const noexcept { return blocks_; }
   // The conditions that were made, in order.
   const std::vector<std::shared_ptr<ManualCondition>>& made() const noexcept { return made_; }
 
  private:
   const std::shared_ptr<detail::WaitScript> script_;
   std::vector<std::shared_ptr<ManualCondition>> made_;
+  std::weak_ptr<void> block_;
+  std::size_t blocks_ = 0;
 };
 
 }  // namespace tarn::testing

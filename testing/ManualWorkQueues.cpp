@@ -1,6 +1,7 @@
 #include "testing/ManualWorkQueues.h"
 
 #include <algorithm>
+#include <atomic>
 #include <cstdio>
 #include <cstdlib>
 #include <deque>
@@ -24,6 +25,8 @@ class ManualSchedule {
   using Filter = std::optional<std::size_t>;  // one queue, or all
 
   explicit ManualSchedule(ManualClock& clock) : clock_(clock) {}
+
+  std::atomic<bool> helps{false};
 
   std::size_t newQueue() {
     const std::lock_guard lock(mutex_);
@@ -211,6 +214,12 @@ void ManualWorkQueue::resume() {
   schedule_->resume(identifier_);
 }
 
+void ManualWorkQueue::help(std::chrono::nanoseconds) {
+  if (schedule_->helps) {
+    schedule_->runUntilIdle(identifier_);
+  }
+}
+
 bool ManualWorkQueue::runOne() {
   return schedule_->runOne(identifier_);
 }
@@ -255,6 +264,10 @@ std::size_t ManualWorkQueues::runUntilIdle() {
 
 std::size_t ManualWorkQueues::advance(std::chrono::nanoseconds duration) {
   return schedule_->advance(duration);
+}
+
+void ManualWorkQueues::setHelps(bool helps) {
+  schedule_->helps = helps;
 }
 
 void ManualWorkQueues::dropAll() {

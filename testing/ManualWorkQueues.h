@@ -37,6 +37,7 @@ class ManualWorkQueue final : public platform::SuspendableQueue {
   std::size_t waiting() const noexcept override;
   void suspend(std::chrono::nanoseconds longest, platform::Work next) override;
   void resume() override;
+  void help(std::chrono::nanoseconds longest) override;
 
   // Controls.
   // Runs the oldest piece of due work of this queue; whether there was one.
@@ -82,6 +83,8 @@ class ManualWorkQueues final : public platform::WorkQueues {
   // Moves the clock on by `duration`, from moment to moment, and runs all work at the moment when it is due. Work that
   // is due before the call runs first. How many pieces ran.
   std::size_t advance(std::chrono::nanoseconds duration);
+  // Whether help() runs what waits on its queue; else every thread of the pool was quicker.
+  void setHelps(bool helps);
   // Destroys all work uncalled, delayed work included.
   void dropAll();
 

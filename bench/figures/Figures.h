@@ -18,6 +18,7 @@ void measureGrowth(const Settings& settings, Table& table);
 void measureSignposts(const Settings& settings, Table& table);
 void measureStop(const Settings& settings, Table& table);
 void measureMirror(const Settings& settings, Table& table);
+void measureTrace(const Settings& settings, Table& table);
 void measureDiagnostics(const Settings& settings, Table& table);
 
 }  // namespace tarn::bench

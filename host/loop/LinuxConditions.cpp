@@ -74,4 +74,12 @@ std::shared_ptr<platform::Condition> LinuxConditions::makeCondition() {
   return std::make_shared<LinuxCondition>(loop_);
 }
 
+std::shared_ptr<void> LinuxConditions::blockOnPurpose() {
+  if (!loop_.queue()->isCurrent()) {
+    return nullptr;
+  }
+  loop_.progress().beginWait(loop_.clock().monotonic());
+  return {&loop_.progress(), [](QueueProgress* progress) { progress->endWait(); }};
+}
+
 }  // namespace tarn::linux_host

@@ -1,5 +1,5 @@
-// LinuxConditions: condition variables. A wait on the server queue is told to the watchdog as a deliberate one, and the
-// main loop serves its sockets meanwhile.
+// LinuxConditions: condition variables. A wait on the server queue, and work that blocks it on purpose, is told to the
+// watchdog; while a wait lasts, the main loop serves its sockets.
 //
 // Owned by the entry point; outlives the conditions that it made. Threads: any.
 #pragma once
@@ -17,6 +17,7 @@ class LinuxConditions final : public platform::Conditions {
   LinuxConditions& operator=(const LinuxConditions&) = delete;
 
   std::shared_ptr<platform::Condition> makeCondition() override;
+  std::shared_ptr<void> blockOnPurpose() override;
 
  private:
   MainLoop& loop_;

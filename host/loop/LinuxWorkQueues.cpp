@@ -11,6 +11,7 @@ class PooledQueue final : public platform::SuspendableQueue {
  public:
   explicit PooledQueue(std::shared_ptr<WorkerPool> pool) : pool_(std::move(pool)) {}
   void async(platform::Work work) override { pool_->add(line_, std::move(work)); }
+  void asyncAtOnce(platform::Work work) override { pool_->add(line_, std::move(work), WorkerPool::Urgency::AtOnce); }
   void asyncAfter(std::chrono::nanoseconds delay, platform::Work work) override {
     pool_->addAfter(line_, delay, std::move(work));
   }
@@ -20,6 +21,7 @@ class PooledQueue final : public platform::SuspendableQueue {
     pool_->suspend(line_, longest, std::move(next));
   }
   void resume() override { pool_->resume(line_); }
+  void help(std::chrono::nanoseconds longest) override { pool_->help(line_, longest); }
 
  private:
   std::shared_ptr<WorkerPool> pool_;

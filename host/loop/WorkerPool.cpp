@@ -85,10 +85,14 @@ void WorkerPool::destroyWhatIsLeft() {
   suspensions_.clear();
 }
 
-void WorkerPool::add(const std::shared_ptr<Line>& line, platform::Work work) {
+void WorkerPool::add(const std::shared_ptr<Line>& line, platform::Work work, Urgency urgency) {
   const std::lock_guard lock(mutex_);
-  if (!over_) {
-    enqueue(line, std::move(work));
+  if (over_) {
+    return;
+  }
+  enqueue(line, std::move(work));
+  if (urgency == Urgency::AtOnce && looking_) {
+    ended_.notify_one();
   }
 }
 
@@ -119,6 +123,21 @@ void WorkerPool::resume(const std::shared_ptr<Line>& line) {
   const std::lock_guard lock(mutex_);
   if (line->suspension) {
     endSuspension(*line->suspension);
+  }
+}
+
+void WorkerPool::help(const std::shared_ptr<Line>& line, nanoseconds longest) {
+  if (CurrentQueue::is(line.get())) {
+    return;
+  }
+  Lock lock(mutex_);
+  ++helpers_;
+  turnEnded_.wait_for(lock, longest, [&line] { return !line->running; });
+  --helpers_;
+  const auto place = std::find(runnable_.begin(), runnable_.end(), line);
+  if (place != runnable_.end()) {
+    runnable_.erase(place);
+    runSome(line, lock);
   }
 }
 
@@ -252,6 +271,7 @@ void WorkerPool::sleep(Lock& lock) {
 }
 
 void WorkerPool::runSome(const std::shared_ptr<Line>& line, Lock& lock) {
+  line->running = true;
   platform::Work next = std::move(line->next);
   if (line->position == line->taken.size()) {
     line->taken.clear();
@@ -261,6 +281,10 @@ void WorkerPool::runSome(const std::shared_ptr<Line>& line, Lock& lock) {
   lock.unlock();
   const std::size_t finished = runTurn(*line, std::move(next));
   lock.lock();
+  line->running = false;
+  if (helpers_ > 0) {
+    turnEnded_.notify_all();
+  }
   const bool more = line->next || line->position < line->taken.size() || !line->incoming.empty();
   line->scheduled = more && !line->suspension;
   if (line->scheduled) {

@@ -7,7 +7,8 @@
 //
 // Which problem: the server queue hands over a piece for every message, and waking a thread is dearer than the piece.
 // How: a thread that runs out of work looks again by itself after half a millisecond before it goes to sleep; while one
-// is about to look, nobody is woken. Whoever finds more than it can do alone wakes another.
+// is about to look, nobody is woken. Whoever finds more than it can do alone wakes another. Work that is urgent ends
+// the look at once.
 //
 // Owned by LinuxWorkQueues; queues hold it too, as they may outlive that. Threads: any.
 #pragma once
@@ -51,7 +52,8 @@ class WorkerPool {
   WorkerPool& operator=(const WorkerPool&) = delete;
   ~WorkerPool() { stop(); }
 
-  // Called on a thread of the pool each time isFull() has become false again. Set before start().
+  // Called each time isFull() has become false again, on a thread of the pool or on that of whoever helps. Set before
+  // start().
   void setRoomHandler(RoomHandler handler) { roomHandler_ = std::move(handler); }
   // Starts the threads, once; later calls do nothing. A system that has no more threads to give ends the process.
   void start(std::size_t threads);
@@ -59,11 +61,15 @@ class WorkerPool {
   // uncalled.
   void stop();
 
-  void add(const std::shared_ptr<Line>& line, platform::Work work);
+  enum class Urgency { Gathered, AtOnce };
+  void add(const std::shared_ptr<Line>& line, platform::Work work, Urgency urgency = Urgency::Gathered);
   void addAfter(const std::shared_ptr<Line>& line, std::chrono::nanoseconds delay, platform::Work work);
   // By work of the line.
   void suspend(const std::shared_ptr<Line>& line, std::chrono::nanoseconds longest, platform::Work next);
   void resume(const std::shared_ptr<Line>& line);
+  // Waits, at most so long, until no thread runs the line; then, if it stands in the pool's line, takes its next turn
+  // on the caller's thread.
+  void help(const std::shared_ptr<Line>& line, std::chrono::nanoseconds longest);
 
   // Pieces handed over and not yet finished, of all queues; what is suspended counts, what is delayed does not.
   std::size_t unfinished() const;
@@ -102,6 +108,8 @@ class WorkerPool {
   std::condition_variable changed_;  // for the sleepers
   std::condition_variable ended_;    // for the one that is about to look
   std::condition_variable settled_;
+  std::condition_variable turnEnded_;  // for those who help
+  std::size_t helpers_ = 0;
   std::deque<std::shared_ptr<Line>> runnable_;
   DelayedWork<Delayed> delayed_;
   Suspensions suspensions_;
@@ -121,6 +129,7 @@ struct WorkerPool::Line {
   platform::Work next;  // what runs first when a suspension is over
   std::optional<Suspensions::iterator> suspension;
   bool scheduled = false;  // stands in the pool's line or is being run
+  bool running = false;
   // Of the thread that runs the line.
   std::vector<platform::Work> taken;
   std::size_t position = 0;

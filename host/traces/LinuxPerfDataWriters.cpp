@@ -24,6 +24,10 @@ constexpr std::size_t kBlockBytes = std::size_t{64} * 1024;
 constexpr mode_t kFilePermissions = 0666;  // less the process's mask
 
 void appendText(std::string& out, std::string_view text) {
+  if (wire::isUtf8(text)) {
+    plist::appendJsonText(out, text);
+    return;
+  }
   std::string mended;
   wire::appendMendedUtf8(mended, text);
   plist::appendJsonText(out, mended);

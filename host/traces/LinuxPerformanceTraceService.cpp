@@ -43,6 +43,7 @@ class LinuxPerformanceTraceService::Session final : public platform::Performance
     if (recording_->askForStop()) thread_->post(TraceThread::Verb::Stop, recording_);
   }
   bool isValid() const override { return recording_->isValid(); }
+  std::uint64_t eventsLeftOut() const override { return recording_->eventsLeftOut(); }
 
  private:
   const std::shared_ptr<TraceThread> thread_;

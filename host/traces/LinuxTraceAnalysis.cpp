@@ -3,6 +3,7 @@
 #include <dlfcn.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <array>
 #include <utility>
 
@@ -24,6 +25,8 @@ constexpr std::string_view kModule = "TraceAnalysis";
 constexpr std::string_view kBesideTheProgram = "../lib/tarnkit/traceanalysis.so";
 // A library that nests its probes deeper, or in a circle, is not followed.
 constexpr int kMostProbeDepth = 64;
+// Room that is made on a library's word.
+constexpr std::uint64_t kMostReserved = std::uint64_t{1} << 21U;
 
 // The tables of a library's classes.
 struct Classes {
@@ -84,6 +87,7 @@ class Model final : public platform::TraceModel {
     const auto& table = *classes_.signpostDataModel;
     std::vector<SignpostInterval> intervals;
     const std::uint64_t count = table.intervalCount(data_.get());
+    intervals.reserve(std::min(count, kMostReserved));
     for (std::uint64_t i = 0; i < count; ++i) {
       intervals.push_back(intervalOf(table.interval(data_.get(), i), secondsPerTick()));
     }
@@ -161,6 +165,7 @@ class Library final : public platform::TraceAnalysisLibrary {
     const auto& intervals = *classes_.signpostIntervalProbe;
     TraceProbe made{textOf(table.name(&probe)), textOf(table.kind(&probe)), intervals.isKindOf(&probe) != 0, {}, {}};
     const std::uint64_t events = made.measuresSignpostIntervals ? intervals.eventCount(&probe) : 0;
+    made.events.reserve(std::min(events, kMostReserved));
     for (std::uint64_t i = 0; i < events; ++i) {
       made.events.push_back(intervalOf(intervals.event(&probe, i), secondsPerTick));
     }

@@ -122,6 +122,7 @@ void TraceRecording::stop() {
   if (!failure_) {
     path = file_->finish();
     logLeftOut();
+    leftOut_ = file_->leftOut();
   }
   file_.reset();
   tell([&](auto& delegate) { delegate.performanceTraceDidComplete(path.value, token_, path.error); });

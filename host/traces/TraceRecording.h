@@ -4,6 +4,7 @@
 // traces' thread, on which the callbacks are made.
 #pragma once
 
+#include <atomic>
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
@@ -53,6 +54,7 @@ class TraceRecording {
   // What a session asks for.
   void setDelegate(std::weak_ptr<platform::PerformanceTraceDelegate> delegate);
   bool isValid() const;
+  std::uint64_t eventsLeftOut() const noexcept { return leftOut_; }
   // Whether the start (the stop) is to be carried out: at most once each, a stop only of a valid trace.
   bool askForStart();
   bool askForStop();
@@ -94,6 +96,7 @@ class TraceRecording {
   std::vector<SignpostRecord> spare_;
   platform::MaybeError failure_;  // of the disk
 
+  std::atomic<std::uint64_t> leftOut_{0};  // set before the completion
   mutable std::mutex mutex_;
   // Guarded by mutex_.
   std::weak_ptr<platform::PerformanceTraceDelegate> delegate_;

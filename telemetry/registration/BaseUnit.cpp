@@ -34,7 +34,6 @@ BaseUnit::BaseUnit(platform::AccessoryQueries* queries) : queries_(queries) {
 
 platform::MaybeError BaseUnit::enumerateBluetoothDevices() {
   TarnReportingLog(TarnReportingAudioRegistrationCategory(), LogLevel::Default, kModule, "Enumerate Bluetooth!");
-  deviceCount_ = 0;
   records_.clear();
   if (queries_ == nullptr) {
     return {};

@@ -46,11 +46,6 @@ plist::Dictionary userInfoOf(const TarnReportingSession& session) {
   return info;
 }
 
-// The category proper, without its domain.
-std::uint16_t backendCategory(AudioEventCategory category) {
-  return static_cast<std::uint16_t>(category);
-}
-
 }  // namespace
 
 TarnReportingRegistrationPublication::TarnReportingRegistrationPublication(
@@ -80,14 +75,19 @@ void TarnReportingRegistrationPublication::begin(const TarnReportingSession& ses
 
 void TarnReportingRegistrationPublication::sendRecords() {
   for (const plist::Dictionary& record : records_) {
-    sendMessage(TarnReportingSessionMessage(record, AudioEventCategory::Tessels, AudioEventType::Summary));
+    _sendMessage(TarnReportingSessionMessage(record, AudioEventCategory::Tessels, AudioEventType::Summary));
   }
   TarnReportingLog(TarnReportingAudioRegistrationCategory(), LogLevel::Debug, kModule, "Message Sent->");
 }
 
-void TarnReportingRegistrationPublication::sendMessage(const TarnReportingSessionMessage& message) {
-  const platform::RtcReportingSession::SendResult result = rtcReportingSession_->sendMessage(
-      backendCategory(message.category()), static_cast<std::uint16_t>(message.type()), message.message());
+// NOLINTNEXTLINE(readability-identifier-naming): its given name
+void TarnReportingRegistrationPublication::_sendMessage(const TarnReportingSessionMessage& message) {
+  if (!rtcReportingSession_) {
+    return;
+  }
+  const platform::RtcReportingSession::SendResult result =
+      rtcReportingSession_->sendMessage(retrieveRTCReportingCategoryFromCategory(message.category()),
+                                        static_cast<std::uint16_t>(message.type()), message.message());
   if (!result.sent) {
     if (result.error) {
       TarnReportingLog(TarnReportingAudioRegistrationCategory(), LogLevel::Error, kModule, "error sending message %@",

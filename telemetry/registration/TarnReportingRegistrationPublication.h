@@ -6,11 +6,13 @@
 #pragma once
 
 #include <atomic>
+#include <cstdint>
 #include <memory>
 #include <string>
 #include <vector>
 
 #include "plist/Dictionary.h"
+#include "service/vocabulary/TarnReportingVocabulary.h"
 
 namespace tarn {
 
@@ -34,11 +36,17 @@ class TarnReportingRegistrationPublication : public std::enable_shared_from_this
   void begin(const TarnReportingSession& session, const std::string& hierarchyToken);
   // Whether backends were found.
   bool started() const noexcept { return started_; }
+  // Sends one message as it is. One that is refused with an error is logged; one that is sent puts the next publication
+  // off by a week. Behind begin(); without a back-end session nothing is sent.
+  void _sendMessage(
+      const TarnReportingSessionMessage& message);  // NOLINT(readability-identifier-naming): its given name
+  // The category proper, without its domain.
+  static std::uint16_t retrieveRTCReportingCategoryFromCategory(AudioEventCategory category) {
+    return static_cast<std::uint16_t>(category);
+  }
 
  private:
   void sendRecords();
-  // One that is refused with an error is logged. One that is sent puts the next publication off by a week.
-  void sendMessage(const TarnReportingSessionMessage& message);
 
   const std::shared_ptr<TarnReportingRegistrationState> state_;
   const std::vector<plist::Dictionary> records_;

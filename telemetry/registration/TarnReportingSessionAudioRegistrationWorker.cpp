@@ -65,7 +65,7 @@ void TarnReportingSessionAudioRegistrationWorker::handleMessage(
     const std::shared_ptr<TarnReportingSessionMessage>& message) {
   static const plist::Key kActiveDevices("active_devices");
   const plist::ValueView devices = message->message().get(kActiveDevices);
-  if (!devices.present() || devices.asText().find(kDeviceSignature) == std::string::npos) {
+  if (devices.asText().find(kDeviceSignature) == std::string::npos) {
     return;
   }
   const double now = currentEpoch();
@@ -138,7 +138,7 @@ std::vector<plist::Dictionary> TarnReportingSessionAudioRegistrationWorker::rece
     plist::Dictionary record = entry.dictionary();
     const plist::Value epoch = record.get(registration::kLastConnectedEpoch);
     record.remove(registration::kLastConnectedEpoch);
-    record.set(registration::kLastConnectedWorkWeek, convertEpochToWorkWeek(epoch.view()));
+    record.set(registration::kLastConnectedWorkWeek, _convertEpochToWorkWeek(epoch.view()));
     if (now - kLookBackSeconds <= wholeEpoch(epoch.view())) {
       records.push_back(std::move(record));
     }
@@ -168,8 +168,21 @@ bool TarnReportingSessionAudioRegistrationWorker::rtcReportingSessionStarted() c
   return publication_ && publication_->started();
 }
 
-int TarnReportingSessionAudioRegistrationWorker::convertEpochToWorkWeek(const plist::ValueView& epoch) {
+std::uint16_t TarnReportingSessionAudioRegistrationWorker::retrieveRTCReportingCategoryFromCategory(
+    AudioEventCategory category) {
+  return TarnReportingRegistrationPublication::retrieveRTCReportingCategoryFromCategory(category);
+}
+
+// Their given names: NOLINTBEGIN(readability-identifier-naming)
+void TarnReportingSessionAudioRegistrationWorker::_sendMessage(const TarnReportingSessionMessage& message) {
+  if (publication_) {
+    publication_->_sendMessage(message);
+  }
+}
+
+int TarnReportingSessionAudioRegistrationWorker::_convertEpochToWorkWeek(const plist::ValueView& epoch) {
   return TarnReportingWorkWeek(TarnReportingFacilities().localCalendar.localTime(wholeEpoch(epoch)));
 }
+// NOLINTEND(readability-identifier-naming)
 
 }  // namespace tarn

@@ -10,6 +10,7 @@
 // Owner: the session. Threads: the server queue; the back-end's completion comes on a thread of its own, at any time.
 #pragma once
 
+#include <cstdint>
 #include <memory>
 #include <optional>
 #include <string>
@@ -41,18 +42,25 @@ class TarnReportingSessionAudioRegistrationWorker : public TarnReportingSessionW
   void stop();
   void handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) override;
 
+  // Opens a back-end session of the registration's own and sends the records through it once a backend is found.
+  void setupRTCReporterInterface(std::vector<plist::Dictionary> records);
   // Whether the last publication found backends.
   bool rtcReportingSessionStarted() const noexcept;
+  // The category as the back-end knows it: without the upper half, which tells groups of tests apart.
+  static std::uint16_t retrieveRTCReportingCategoryFromCategory(AudioEventCategory category);
 
+  // Their given names: NOLINTBEGIN(readability-identifier-naming)
+  // Sends one message through the last publication's back-end session; without one nothing is sent.
+  void _sendMessage(const TarnReportingSessionMessage& message);
   // The work week (1 to 53) of a moment in the device's time zone. The number counts as whole seconds since 1970 of 32
   // bits without a sign; larger ones wrap.
-  static int convertEpochToWorkWeek(const plist::ValueView& epoch);
+  static int _convertEpochToWorkWeek(const plist::ValueView& epoch);
+  // NOLINTEND(readability-identifier-naming)
 
  private:
   void enumerate();
   void publish(double now);
   std::vector<plist::Dictionary> recentRecords(double now) const;
-  void setupRTCReporterInterface(std::vector<plist::Dictionary> records);
 
   const std::shared_ptr<TarnReportingRegistrationState> state_;
   // The last one; kept, since letting go of a back-end session ends it.

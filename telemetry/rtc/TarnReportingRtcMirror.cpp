@@ -8,7 +8,6 @@
 #include "service/vocabulary/TarnReportingPlatform.h"
 #include "service/vocabulary/TarnReportingUtility.h"
 #include "session/TarnReportingSessionKeys.h"
-#include "telemetry/rtc/TarnReportingRtcSummary.h"
 
 namespace tarn {
 
@@ -67,7 +66,7 @@ plist::Array arrayOf(const std::vector<std::string>& texts) {
 std::uint16_t TarnReportingRtcMirror::retrieveRTCReportingCategoryFromCategory(AudioEventCategory category) {
   // Asked for, and of no influence: messages of test groups go where all others go.
   static_cast<void>(TarnReportingUtilityIsABTestModeOn(category));
-  return static_cast<std::uint16_t>(static_cast<std::uint32_t>(category) & 0xFFFFU);
+  return static_cast<std::uint16_t>(category);
 }
 
 bool TarnReportingRtcMirror::shouldBatchRTCReportingEventsForServiceType(AudioServiceType serviceType) {
@@ -83,13 +82,24 @@ const std::shared_ptr<platform::SuspendableQueue>& TarnReportingRtcMirror::rtcRe
 }
 
 void TarnReportingRtcMirror::start(const Started& session) {
+  const bool asked = open(session);
+  starting_ = false;
+  if (asked) {
+    log(LogLevel::Default, "waiting to find backends");
+    rtcreportingBackendSemaphore_.wait(rtcReportingQueue_, kBackendWait,
+                                       [self = shared_from_this()](bool signalled) { self->endWait(signalled); });
+  }
+}
+
+// Asks for backends; false without a token.
+bool TarnReportingRtcMirror::open(const Started& session) {
   constexpr std::string_view kOperation = "start";
   log(LogLevel::Debug, "entering rtcreporting %s", kOperation);
   rtcReportingAgentToken_ = service_.newHierarchyToken(std::nullopt);
   if (!rtcReportingAgentToken_) {
     log(LogLevel::Error, "newHierarchyTokenFromParentToken returned nil. Will skip rtc for this session. %s",
         kOperation);
-    return;
+    return false;
   }
   rtcReportingSession_ =
       service_.createSession(sessionInfoOf(session, *rtcReportingAgentToken_), userInfoOf(session), std::nullopt);
@@ -97,9 +107,7 @@ void TarnReportingRtcMirror::start(const Started& session) {
     rtcReportingSession_->startConfiguration(
         [self = shared_from_this()](const Backends& backends) { self->foundBackends(backends); });
   }
-  log(LogLevel::Default, "waiting to find backends");
-  rtcreportingBackendSemaphore_.wait(rtcReportingQueue_, kBackendWait,
-                                     [self = shared_from_this()](bool signalled) { self->endWait(signalled); });
+  return true;
 }
 
 void TarnReportingRtcMirror::foundBackends(const Backends& backends) {
@@ -153,7 +161,7 @@ void TarnReportingRtcMirror::stop(const Stopped& session) {
 }
 
 void TarnReportingRtcMirror::sendSummary(const Stopped& session) {
-  TarnReportingRtcSummary summary = TarnReportingMakeRtcSummary(session.serviceType, session.messages);
+  TarnReportingRtcSummary summary = TarnReportingMakeRtcSummary(session.serviceType, session.messages, longestSummary_);
   if (!summary.complete) {
     log(LogLevel::Error, "rtc summary event is cut, the session has too many messages. reporterID=%lli",
         session.reporterID);

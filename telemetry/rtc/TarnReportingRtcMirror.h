@@ -14,6 +14,7 @@
 #pragma once
 
 #include <atomic>
+#include <cstddef>
 #include <cstdint>
 #include <memory>
 #include <optional>
@@ -26,6 +27,7 @@
 #include "service/vocabulary/TarnReportingVocabulary.h"
 #include "session/TarnReportingSessionMessage.h"
 #include "telemetry/rtc/TarnReportingQueueSemaphore.h"
+#include "telemetry/rtc/TarnReportingRtcSummary.h"
 
 namespace tarn {
 
@@ -49,8 +51,10 @@ class TarnReportingRtcMirror : public std::enable_shared_from_this<TarnReporting
     std::int64_t reporterID;
   };
 
-  // The service outlives this.
-  explicit TarnReportingRtcMirror(platform::RtcReportingService& service) : service_(service) {}
+  // The service outlives this. Behind so many bytes the summary event is cut.
+  explicit TarnReportingRtcMirror(platform::RtcReportingService& service,
+                                  std::size_t longestSummary = TarnReportingRtcSummary::kLongestText)
+      : service_(service), longestSummary_(longestSummary) {}
   TarnReportingRtcMirror(const TarnReportingRtcMirror&) = delete;
   TarnReportingRtcMirror& operator=(const TarnReportingRtcMirror&) = delete;
 
@@ -63,14 +67,18 @@ class TarnReportingRtcMirror : public std::enable_shared_from_this<TarnReporting
   // The worker's own flag: the session writes it at start and stop, a completion with a list sets it.
   bool started() const noexcept { return started_.load(); }
   void setStarted(bool started) noexcept { started_.store(started); }
+  // Whether a start was handed over that has not asked for backends yet.
+  bool isStarting() const noexcept { return starting_.load(); }
+  void setStarting() noexcept { starting_.store(true); }
   // Whether a session of the service can be used.
   bool rtcReportingSessionStarted() const noexcept { return rtcReportingSessionStarted_.load(); }
 
-  // The tasks.
+  // The tasks, and what else is of the private queue.
   void start(const Started& session);
   void handleMessage(const MessagePointer& message);
   void stop(const Stopped& session);
 
+  const std::optional<std::string>& rtcReportingAgentToken() const noexcept { return rtcReportingAgentToken_; }
   // Sends one message; outside internal builds its record loses the time stamp. Without a session of the service
   // nothing is sent.
   void _sendMessage(const MessagePointer& message);  // NOLINT(readability-identifier-naming): its given name
@@ -78,14 +86,17 @@ class TarnReportingRtcMirror : public std::enable_shared_from_this<TarnReporting
  private:
   using Backends = std::optional<std::vector<std::string>>;
 
+  bool open(const Started& session);
   void foundBackends(const Backends& backends);  // on the service's thread
   void endWait(bool signalled);
   void sendSummary(const Stopped& session);
   void release();
 
   platform::RtcReportingService& service_;
+  const std::size_t longestSummary_;
   std::atomic<bool> started_{false};
   std::atomic<bool> rtcReportingSessionStarted_{false};
+  std::atomic<bool> starting_{false};
   TarnReportingQueueSemaphore rtcreportingBackendSemaphore_;
   std::shared_ptr<platform::SuspendableQueue> rtcReportingQueue_;
   // Of the private queue.

@@ -1,6 +1,7 @@
 #include "telemetry/rtc/TarnReportingSessionRtcWorker.h"
 
 #include <algorithm>
+#include <chrono>
 #include <string>
 #include <utility>
 
@@ -14,6 +15,8 @@ namespace tarn {
 namespace {
 
 constexpr std::string_view kServiceNameSuffix = "_session";
+// For which a stop waits at the most while another thread carries out the start, which asks for backends and no more.
+constexpr std::chrono::milliseconds kStartHelp{20};
 
 bool isAddressedToRtc(const TarnReportingSessionMessage& message) {
   const auto& destinations = message.destinationWorkers();
@@ -80,7 +83,9 @@ bool TarnReportingSessionRtcWorker::start() {
   }
   std::string serviceName(owner->serviceName());
   serviceName += kServiceNameSuffix;
-  rtcReportingQueue()->async(
+  // At once: a completion that comes after the session's stop keeps the worker out of the next start.
+  mirror_->setStarting();
+  rtcReportingQueue()->asyncAtOnce(
       [mirror = mirror_, started = TarnReportingRtcMirror::Started{
                              owner->configuration(), std::move(serviceName), owner->serviceType(), owner->reporterID(),
                              owner->isSingleMessageSession()}] { mirror->start(started); });
@@ -96,6 +101,9 @@ void TarnReportingSessionRtcWorker::stop() {
   const std::shared_ptr<TarnReportingSession> owner = session();
   if (!owner) {
     return;
+  }
+  if (mirror_->isStarting()) {
+    rtcReportingQueue()->help(kStartHelp);  // so that it completes before this stop
   }
   rtcReportingQueue()->async([mirror = mirror_, stopped = snapshotOf(*owner)] { mirror->stop(stopped); });
 }

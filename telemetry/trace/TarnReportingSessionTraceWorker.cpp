@@ -76,7 +76,7 @@ bool TarnReportingSessionTraceWorker::start() {
   }
   const plist::Dictionary configuration = owner->configuration();
   const std::string_view descriptions = configuredText(configuration, kProbeDescriptionsKey);
-  if (descriptions.empty() || !TarnReportingFacilities().fileSystem.exists(descriptions)) {
+  if (!TarnReportingFacilities().fileSystem.exists(descriptions)) {
     log(LogLevel::Error, "Could not start PerformanceTrace. TarnReportingSkeinPlistFilePath: %@ is not a valid path",
         configuration.get(kProbeDescriptionsKey));
     return started();
@@ -99,7 +99,9 @@ void TarnReportingSessionTraceWorker::stop() {
   if (recording_->stop() != TarnReportingTraceRecording::End::Completed) {
     return;
   }
-  TarnReportingTraceResults results(*owner, mPerfDataName_);
+  // The queue stands still meanwhile, and is known to.
+  const auto block = TarnReportingFacilities().conditions.blockOnPurpose();
+  TarnReportingTraceResults results(*owner, mPerfDataName_, recording_->eventsLeftOut());
   results.processTraceSkein(recording_->finalTraceURL());
 }
 

@@ -62,6 +62,11 @@ std::optional<std::string> TarnReportingTraceRecording::finalTraceURL() const {
   return finalTraceURL_;
 }
 
+std::uint64_t TarnReportingTraceRecording::eventsLeftOut() const {
+  const std::lock_guard lock(*condition_);
+  return eventsLeftOut_;
+}
+
 void TarnReportingTraceRecording::performanceTraceDidStart(const platform::MaybeError& error) {
   if (!isFirst(startTold_)) {
     return;
@@ -94,6 +99,9 @@ void TarnReportingTraceRecording::performanceTraceDidComplete(const std::string&
   }
   if (const auto completed = clearTraceSession()) {
     completed->setDelegate({});
+    const std::uint64_t leftOut = completed->eventsLeftOut();
+    const std::lock_guard lock(*condition_);
+    eventsLeftOut_ = leftOut;
   }
   if (error) {
     log(LogLevel::Error, "performanceTraceDidComplete %@", error->text);

@@ -10,6 +10,7 @@
 
 #include <chrono>
 #include <cstddef>
+#include <cstdint>
 #include <memory>
 #include <optional>
 #include <string>
@@ -39,6 +40,8 @@ class TarnReportingTraceRecording final : public platform::PerformanceTraceDeleg
   End stop();
   // Where the finished trace lies.
   std::optional<std::string> finalTraceURL() const;
+  // How many events it lacks.
+  std::uint64_t eventsLeftOut() const;
 
   void performanceTraceDidStart(const platform::MaybeError& error) override;
   void performanceTraceDidStop(const platform::MaybeError& error) override;
@@ -58,6 +61,7 @@ class TarnReportingTraceRecording final : public platform::PerformanceTraceDeleg
   std::size_t signals_ = 0;  // that nobody waited for yet
   std::shared_ptr<platform::PerformanceTraceSession> traceSession_;
   std::optional<std::string> finalTraceURL_;
+  std::uint64_t eventsLeftOut_ = 0;
   bool startTold_ = false;
   bool stopTold_ = false;
   bool completionTold_ = false;

@@ -83,8 +83,9 @@ std::string pathIn(std::string directory, std::string_view file) {
 
 }  // namespace
 
-TarnReportingTraceResults::TarnReportingTraceResults(const TarnReportingSession& session, std::string perfDataName)
-    : session_(session), mPerfDataName_(std::move(perfDataName)) {}
+TarnReportingTraceResults::TarnReportingTraceResults(const TarnReportingSession& session, std::string perfDataName,
+                                                     std::uint64_t eventsLeftOut)
+    : session_(session), mPerfDataName_(std::move(perfDataName)), eventsLeftOut_(eventsLeftOut) {}
 
 void TarnReportingTraceResults::processTraceSkein(const std::optional<std::string>& tracePath) {
   const plist::ValueView path = tracePath ? plist::ValueView(*tracePath) : plist::ValueView();
@@ -225,6 +226,11 @@ void TarnReportingTraceResults::writeExtensions() {
   const auto database = mWriter_->startExtension("@tdg-perf.database_id");
   mWriter_->stringMember(database, "InfluxDB", "TarnReporter");
   mWriter_->endExtension(database);
+  if (eventsLeftOut_ > 0) {
+    const auto trace = mWriter_->startExtension("@tdg-perf.trace");
+    mWriter_->stringMember(trace, "eventsLeftOut", std::to_string(eventsLeftOut_));
+    mWriter_->endExtension(trace);
+  }
 }
 
 void TarnReportingTraceResults::closeAndMove() {

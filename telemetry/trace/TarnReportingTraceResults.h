@@ -5,12 +5,16 @@
 //   every event of the probes that the session's configuration describes, children first, with the same two sums behind
 //   the last event of a probe. Events of probes of one name that follow each other are summed together.
 //
+// The measurements of a trace that lacks events are those of what is left of it: such a file has an extension
+// "@tdg-perf.trace" with the member "eventsLeftOut", how many there were.
+//
 // The file is written under a temporary name and moved to its place when it is whole.
 //
 // Threads: the server queue. One object is for one trace.
 #pragma once
 
 #include <cstddef>
+#include <cstdint>
 #include <memory>
 #include <optional>
 #include <string>
@@ -28,8 +32,8 @@ class TarnReportingSession;
 
 class TarnReportingTraceResults {
  public:
-  // Looks at the session; it must outlive this object.
-  TarnReportingTraceResults(const TarnReportingSession& session, std::string perfDataName);
+  // Looks at the session; it must outlive this object. `eventsLeftOut` are those that the trace lacks.
+  TarnReportingTraceResults(const TarnReportingSession& session, std::string perfDataName, std::uint64_t eventsLeftOut);
   TarnReportingTraceResults(const TarnReportingTraceResults&) = delete;
   TarnReportingTraceResults& operator=(const TarnReportingTraceResults&) = delete;
 
@@ -52,6 +56,7 @@ class TarnReportingTraceResults {
 
   const TarnReportingSession& session_;
   const std::string mPerfDataName_;
+  const std::uint64_t eventsLeftOut_;
   std::unique_ptr<platform::PerfDataWriter> mWriter_;
   std::string fullWriterPath_;
   std::string tempWriterPath_;

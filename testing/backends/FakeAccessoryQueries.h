@@ -3,7 +3,9 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <map>
+#include <utility>
 #include <vector>
 
 #include "platform/AccessoryQueries.h"
@@ -17,6 +19,7 @@ class FakeAccessoryQueries final : public platform::AccessoryQueries {
   // The interface.
   platform::Outcome<std::uint16_t> enumerate() override {
     ++enumerations_;
+    if (onEnumerate_) onEnumerate_();
     if (error_) return {0, error_};
     found_ = accessories_;
     return {static_cast<std::uint16_t>(found_.size()), {}};
@@ -25,6 +28,7 @@ class FakeAccessoryQueries final : public platform::AccessoryQueries {
     return accessoryIndex < found_.size() && found_[accessoryIndex].contains(platform::AccessoryPart::Case);
   }
   plist::Dictionary parameters(platform::AccessoryPart part, std::uint16_t accessoryIndex) const override {
+    askedFor_.push_back(accessoryIndex);
     if (accessoryIndex >= found_.size()) return {};
     const auto found = found_[accessoryIndex].find(part);
     return found == found_[accessoryIndex].end() ? plist::Dictionary() : found->second;
@@ -32,15 +36,22 @@ class FakeAccessoryQueries final : public platform::AccessoryQueries {
 
   // Controls. What is laid out is seen by the next enumeration.
   void add(Accessory accessory) { accessories_.push_back(std::move(accessory)); }
+  void clear() { accessories_.clear(); }
+  // What happens while an enumeration runs.
+  void onEnumerate(std::function<void()> hook) { onEnumerate_ = std::move(hook); }
   void failEnumeration(platform::MaybeError error) { error_ = std::move(error); }
 
   // Observations.
   std::size_t enumerations() const noexcept { return enumerations_; }
+  // The accessories whose parts somebody asked for, in order.
+  const std::vector<std::uint16_t>& askedFor() const noexcept { return askedFor_; }
 
  private:
   std::vector<Accessory> accessories_;
   std::vector<Accessory> found_;
   platform::MaybeError error_;
+  std::function<void()> onEnumerate_;
+  mutable std::vector<std::uint16_t> askedFor_;
   std::size_t enumerations_ = 0;
 };
 

@@ -11,7 +11,7 @@ class FakePerfDataWriters::Writer final : public platform::PerfDataWriter {
     file_->values.emplace_back(name, value);
   }
   Extension startExtension(std::string_view name) override {
-    file_->extensions.push_back({std::string(name), {}, false});
+    file_->extensions.push_back({std::string(name), {}, false, file_->values.size()});
     return static_cast<Extension>(file_->extensions.size());
   }
   void stringMember(Extension extension, std::string_view name, std::string_view text) override {

@@ -1,6 +1,7 @@
 // FakePerfDataWriters: result files as lists of what was written. Threads: one at a time.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <memory>
 #include <string>
@@ -18,6 +19,7 @@ class FakePerfDataWriters final : public platform::PerfDataWriters {
     std::string name;
     std::vector<std::pair<std::string, std::string>> members;
     bool ended = false;
+    std::size_t valuesBefore = 0;  // that were written before it began
   };
   struct File {
     std::string path;

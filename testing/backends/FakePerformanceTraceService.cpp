@@ -14,6 +14,7 @@ struct FakePerformanceTraceService::Ledger {
   MaybeError startError;
   MaybeError stopError;
   MaybeError completionError;
+  std::uint64_t eventsLeftOut = 0;
   std::vector<Trace> traces;
   ReplyFaults callbacks;
 };
@@ -32,6 +33,7 @@ class FakePerformanceTraceService::Session final : public platform::PerformanceT
   void setDelegate(std::weak_ptr<PerformanceTraceDelegate> delegate) override {
     const std::lock_guard lock(ledger_->mutex);
     delegate_ = std::move(delegate);
+    ledger_->traces[index_].hasDelegate = !delegate_.expired();
   }
 
   void startTrace() override {
@@ -66,6 +68,11 @@ class FakePerformanceTraceService::Session final : public platform::PerformanceT
   bool isValid() const override {
     const std::lock_guard lock(ledger_->mutex);
     return valid_;
+  }
+
+  std::uint64_t eventsLeftOut() const override {
+    const std::lock_guard lock(ledger_->mutex);
+    return ledger_->eventsLeftOut;
   }
 
  private:
@@ -104,7 +111,7 @@ std::shared_ptr<platform::PerformanceTraceSession> FakePerformanceTraceService::
     const platform::PerformanceTraceConfiguration& configuration) {
   const std::lock_guard lock(ledger_->mutex);
   if (!ledger_->makesSessions) return nullptr;
-  ledger_->traces.push_back({configuration, 0, 0, false});
+  ledger_->traces.push_back({configuration, 0, 0, false, false});
   return std::make_shared<Session>(ledger_, ledger_->traces.size() - 1);
 }
 
@@ -126,6 +133,11 @@ void FakePerformanceTraceService::failStop(MaybeError error) {
 void FakePerformanceTraceService::failCompletion(MaybeError error) {
   const std::lock_guard lock(ledger_->mutex);
   ledger_->completionError = std::move(error);
+}
+
+void FakePerformanceTraceService::setEventsLeftOut(std::uint64_t count) {
+  const std::lock_guard lock(ledger_->mutex);
+  ledger_->eventsLeftOut = count;
 }
 
 ReplyFaults& FakePerformanceTraceService::callbacks() {

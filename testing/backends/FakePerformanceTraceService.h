@@ -5,6 +5,7 @@
 #pragma once
 
 #include <cstddef>
+#include <cstdint>
 #include <memory>
 #include <string>
 #include <vector>
@@ -20,7 +21,8 @@ class FakePerformanceTraceService final : public platform::PerformanceTraceServi
     platform::PerformanceTraceConfiguration configuration;
     std::size_t starts = 0;
     std::size_t stops = 0;
-    bool released = false;  // nobody holds the session any more
+    bool released = false;     // nobody holds the session any more
+    bool hasDelegate = false;  // one was set and not taken away
   };
 
   FakePerformanceTraceService();
@@ -37,6 +39,8 @@ class FakePerformanceTraceService final : public platform::PerformanceTraceServi
   void failStart(platform::MaybeError error);
   void failStop(platform::MaybeError error);
   void failCompletion(platform::MaybeError error);
+  // How many events finished traces say that they lack.
+  void setEventsLeftOut(std::uint64_t count);
   // How the callbacks come. A start is one delivery; so is a stop, with its two callbacks.
   ReplyFaults& callbacks();
 

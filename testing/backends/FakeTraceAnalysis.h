@@ -2,9 +2,11 @@
 #pragma once
 
 #include <cstddef>
+#include <functional>
 #include <memory>
 #include <string>
 #include <string_view>
+#include <utility>
 #include <vector>
 
 #include "platform/TraceAnalysis.h"
@@ -22,6 +24,8 @@ class FakeTraceAnalysis final : public platform::TraceAnalysis {
   Loaded load() override;
 
   // Controls.
+  // What happens while the library is loaded.
+  void onLoad(std::function<void()> hook) { onLoad_ = std::move(hook); }
   void setMissingClass(std::string name) { missingClass_ = std::move(name); }
   void failOpening(platform::MaybeError error);
   void failIntervals(platform::MaybeError error);
@@ -40,6 +44,7 @@ class FakeTraceAnalysis final : public platform::TraceAnalysis {
   struct Content;
 
   const std::shared_ptr<Content> content_;
+  std::function<void()> onLoad_;
   std::string missingClass_;
   std::size_t loads_ = 0;
 };

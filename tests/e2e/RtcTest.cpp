@@ -184,6 +184,30 @@ TEST_F(Rtc, ACompletionBehindNineSecondsIsTooLate) {
   EXPECT_EQ(stopService(SIGTERM), 0);
 }
 
+// A completion that comes after the stop keeps the mirror out of the next period; it is to be rare.
+TEST_F(Rtc, PeriodsThatFollowEachOtherAtOnceAreMirroredEach) {
+  constexpr std::size_t kPeriods = 1000;
+  ASSERT_TRUE(startService({"--log-level", "error"}));
+  const auto client = connect();
+  ASSERT_TRUE(client->createReportingSession(1).ok());
+  for (std::size_t period = 0; period < kPeriods; ++period) {
+    ASSERT_EQ(client->startReportingSessionForID(1), client::SendStatus::Sent);
+    ASSERT_TRUE(client->sendMessage({{"number", period}}, 4, 1, std::vector<std::int64_t>{1}).ok());
+    ASSERT_TRUE(client->stopReportingSessionForID(1).ok());
+  }
+  ledgerAtRest();
+  const auto found = rtcEvents();
+  const auto count = [&](std::string_view name) {
+    return static_cast<std::size_t>(
+        std::count_if(found.begin(), found.end(), [&](const Event& event) { return event.name == name; }));
+  };
+  EXPECT_GE(count("createSession"), kPeriods - 1);
+  EXPECT_LE(count("createSession"), kPeriods);
+  // A period that is mirrored is so whole: its message, the session's summary and that of the mirror, its flush.
+  EXPECT_EQ(count("sendMessage"), 3 * count("createSession"));
+  EXPECT_EQ(count("flush"), count("createSession"));
+}
+
 TEST_F(Rtc, TheEndCommitsWhatTheWorkersQueuesHold) {
   ASSERT_TRUE(startConfigured(""));
   const auto client = connect();

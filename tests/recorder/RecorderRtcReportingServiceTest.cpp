@@ -74,8 +74,15 @@ TEST_F(RecorderRtcReportingServiceTest, CompletionReportsTheListAnEmptyOneOrNone
   }
 }
 
-TEST_F(RecorderRtcReportingServiceTest, CompletionComesOnAThreadOfItsOwn) {
+TEST_F(RecorderRtcReportingServiceTest, CompletionWithoutADelayComesWithinTheCall) {
   const auto service = makeService({});
+  std::optional<std::thread::id> thread;
+  makeSession(*service)->startConfiguration([&](const Backends&) { thread = std::this_thread::get_id(); });
+  EXPECT_EQ(thread, std::this_thread::get_id());
+}
+
+TEST_F(RecorderRtcReportingServiceTest, LateCompletionComesOnAThreadOfItsOwn) {
+  const auto service = makeService({.startDelay = 1ms});
   std::promise<std::thread::id> thread;
   makeSession(*service)->startConfiguration([&](const Backends&) { thread.set_value(std::this_thread::get_id()); });
   EXPECT_NE(thread.get_future().get(), std::this_thread::get_id());

@@ -7,19 +7,18 @@
 #include <algorithm>
 #include <cerrno>
 #include <cmath>
-#include <cstdio>
+#include <functional>
 #include <map>
 #include <memory>
-#include <nlohmann/json.hpp>
 #include <system_error>
 #include <unordered_map>
 #include <utility>
 
+#include "host/traces/analysis/JsonScanner.h"
+
 namespace tarn::trace_analysis {
 
 namespace {
-
-using Json = nlohmann::json;
 
 // Beyond it nanoseconds don't fit; some hundred years.
 constexpr double kMostMicroseconds = 4e15;
@@ -40,19 +39,37 @@ struct Event {
 class Texts {
  public:
   std::uint32_t number(std::string_view text) {
-    const auto [place, isNew] = numbers_.try_emplace(std::string(text), static_cast<std::uint32_t>(texts_.size()));
-    if (isNew) texts_.emplace_back(text);
-    return place->second;
+    if (const auto known = numbers_.find(text); known != numbers_.end()) return known->second;
+    const auto next = static_cast<std::uint32_t>(texts_.size());
+    numbers_.emplace(texts_.emplace_back(text), next);
+    return next;
   }
   std::vector<std::string> take() { return std::move(texts_); }
 
  private:
-  std::unordered_map<std::string, std::uint32_t> numbers_;
+  struct Hash {
+    using is_transparent = void;  // NOLINT(readability-identifier-naming): the standard library's name
+    std::size_t operator()(std::string_view text) const noexcept { return std::hash<std::string_view>()(text); }
+  };
+  std::unordered_map<std::string, std::uint32_t, Hash, std::equal_to<>> numbers_;
   std::vector<std::string> texts_;
 };
 
-// Listens to the parser: keeps the events that may make intervals and looks past everything else.
-class Listener final : public nlohmann::json_sax<Json> {
+// The members of the text that matter.
+enum class Member { Other, Events, Phase, Process, Thread, Time, Duration, Name, Category };
+
+Member memberOf(std::string_view key) noexcept {
+  constexpr std::pair<std::string_view, Member> kMembers[] = {
+      {"name", Member::Name},    {"cat", Member::Category}, {"ph", Member::Phase},   {"ts", Member::Time},
+      {"dur", Member::Duration}, {"pid", Member::Process},  {"tid", Member::Thread}, {"traceEvents", Member::Events}};
+  for (const auto& [name, member] : kMembers) {
+    if (key == name) return member;
+  }
+  return Member::Other;
+}
+
+// Keeps the events that may make intervals and looks past everything else.
+class Listener final : public JsonListener {
  public:
   explicit Listener(const TraceLimits& limits) : limits_(limits) {}
 
@@ -61,36 +78,25 @@ class Listener final : public nlohmann::json_sax<Json> {
   bool foundEvents() const { return eventsDepth_ != 0; }
   const std::string& failure() const { return failure_; }
 
-  bool null() override { return true; }
-  bool boolean(bool /*value*/) override { return true; }
-  bool number_integer(number_integer_t value) override { return takeWhole(value); }
-  bool number_unsigned(number_unsigned_t value) override {
-    return takeWhole(static_cast<std::int64_t>(std::min<number_unsigned_t>(value, INT64_MAX)));
-  }
-  bool number_float(number_float_t value, const string_t& /*text*/) override { return takeTime(value); }
-  bool string(string_t& value) override {
-    takeText(value);
-    return true;
-  }
-  bool binary(binary_t& /*value*/) override { return true; }
-  bool start_object(std::size_t /*size*/) override {
+  bool beginObject() override {
     if (++depth_ == eventsDepth_ + 1 && inEvents_) {
       event_ = {};
-      key_.clear();
+      hasSubsystem_ = false;
+      member_ = Member::Other;
     }
     return isWithinDepth();
   }
-  bool key(string_t& value) override {
-    key_ = value;
+  bool key(std::string_view key) override {
+    member_ = memberOf(key);
     return true;
   }
-  bool end_object() override {
+  bool endObject() override {
     if (depth_-- == eventsDepth_ + 1 && inEvents_) return keepEvent();
     return true;
   }
-  bool start_array(std::size_t /*size*/) override {
+  bool beginArray() override {
     ++depth_;
-    const bool isEvents = depth_ == 1 || (depth_ == 2 && !rootIsArray_ && key_ == "traceEvents");
+    const bool isEvents = depth_ == 1 || (depth_ == 2 && !rootIsArray_ && member_ == Member::Events);
     if (isEvents && eventsDepth_ == 0) {
       eventsDepth_ = depth_;
       inEvents_ = true;
@@ -98,55 +104,53 @@ class Listener final : public nlohmann::json_sax<Json> {
     }
     return isWithinDepth();
   }
-  bool end_array() override {
+  bool endArray() override {
     if (depth_-- == eventsDepth_) inEvents_ = false;
     return true;
   }
-  bool parse_error(std::size_t position, const std::string& /*token*/, const Json::exception& /*error*/) override {
-    failure_ = "it is no whole JSON text: at byte " + std::to_string(position);
-    return false;
+  bool text(std::string_view text) override {
+    if (!isOfEvent()) return true;
+    if (member_ == Member::Phase) {
+      event_.phase = text.size() == 1 ? text[0] : '\0';
+    } else if (member_ == Member::Name) {
+      event_.name = texts_.number(text);
+      event_.hasName = true;
+    } else if (member_ == Member::Category) {
+      event_.subsystem = texts_.number(text.substr(0, text.find(',')));
+      hasSubsystem_ = true;
+    }
+    return true;
+  }
+  bool number(const Number& number) override {
+    if (!isOfEvent()) return true;
+    if (member_ == Member::Process && number.isWhole) event_.process = number.whole;
+    if (member_ == Member::Thread && number.isWhole) event_.thread = number.whole;
+    if (member_ == Member::Time || member_ == Member::Duration) takeTime(number.value);
+    return true;
   }
 
  private:
-  bool isMember() const { return inEvents_ && depth_ == eventsDepth_ + 1; }
+  bool isOfEvent() const { return inEvents_ && depth_ == eventsDepth_ + 1; }
   bool isWithinDepth() {
     if (depth_ <= limits_.mostDepth) return true;
     failure_ = "its values nest too deep";
     return false;
   }
-  bool takeWhole(std::int64_t value) {
-    if (isMember() && key_ == "pid") event_.process = value;
-    if (isMember() && key_ == "tid") event_.thread = value;
-    return takeTime(static_cast<double>(value));
-  }
-  bool takeTime(double microseconds) {
-    if (!isMember() || !(std::abs(microseconds) <= kMostMicroseconds)) return true;
+  void takeTime(double microseconds) {
+    if (!(std::abs(microseconds) <= kMostMicroseconds)) return;
     const auto nanoseconds = static_cast<std::int64_t>(std::llround(microseconds * 1000));
-    if (key_ == "ts") {
+    if (member_ == Member::Time) {
       event_.time = nanoseconds;
       event_.hasTime = true;
-    } else if (key_ == "dur") {
+    } else {
       event_.duration = nanoseconds;
       event_.hasDuration = true;
-    }
-    return true;
-  }
-  void takeText(const std::string& text) {
-    if (!isMember()) return;
-    if (key_ == "ph") {
-      event_.phase = text.size() == 1 ? text[0] : '\0';
-    } else if (key_ == "name") {
-      event_.name = texts_.number(text);
-      event_.hasName = true;
-    } else if (key_ == "cat") {
-      event_.subsystem = texts_.number(std::string_view(text).substr(0, text.find(',')));
-      hasSubsystem_ = true;
     }
   }
   bool keepEvent() {
     const bool isComplete = event_.phase == 'X' && event_.hasDuration && event_.duration >= 0 && event_.hasName;
     const bool isPart = (event_.phase == 'B' && event_.hasName) || event_.phase == 'E';
-    if (!std::exchange(hasSubsystem_, false)) event_.subsystem = texts_.number({});
+    if (!hasSubsystem_) event_.subsystem = texts_.number({});
     if (!event_.hasTime || !(isComplete || isPart)) return true;
     if (events_.size() >= limits_.mostEvents) {
       failure_ = "it has more than " + std::to_string(limits_.mostEvents) + " events";
@@ -162,7 +166,7 @@ class Listener final : public nlohmann::json_sax<Json> {
   bool inEvents_ = false;
   bool rootIsArray_ = false;
   bool hasSubsystem_ = false;
-  std::string key_;
+  Member member_ = Member::Other;  // of the value that comes next
   Event event_;
   std::vector<Event> events_;
   Texts texts_;
@@ -221,13 +225,30 @@ std::vector<Interval> intervalsOf(std::vector<Event>& events) {
   return intervals;
 }
 
-template <class Input>
-ReadTrace parse(Input&& input, const TraceLimits& limits) {
+ReadTrace systemFailure(int number) {
+  return {{}, number, std::generic_category().message(number)};
+}
+
+struct Descriptor {
+  explicit Descriptor(int opened) : number(opened) {}
+  ~Descriptor() {
+    if (number >= 0) ::close(number);
+  }
+  Descriptor(const Descriptor&) = delete;
+  Descriptor& operator=(const Descriptor&) = delete;
+
+  const int number;
+};
+
+}  // namespace
+
+ReadTrace parseTrace(std::string_view bytes, const TraceLimits& limits) {
+  if (bytes.size() > limits.mostBytes) return systemFailure(EFBIG);
   ReadTrace read;
   Listener listener(limits);
-  const bool isWhole = Json::sax_parse(std::forward<Input>(input), &listener);
-  if (!isWhole) {
-    read.failure = listener.failure().empty() ? "it is no whole JSON text" : listener.failure();
+  if (const auto position = scanJson(bytes, listener)) {
+    read.failure = listener.failure();
+    if (read.failure.empty()) read.failure = "it is no whole JSON text: at byte " + std::to_string(*position);
   } else if (!listener.foundEvents()) {
     read.failure = "it has no array of trace events";
   } else {
@@ -237,36 +258,24 @@ ReadTrace parse(Input&& input, const TraceLimits& limits) {
   return read;
 }
 
-ReadTrace systemFailure(int number) {
-  return {{}, number, std::generic_category().message(number)};
-}
-
-struct Closer {
-  void operator()(std::FILE* file) const { static_cast<void>(std::fclose(file)); }
-};
-
-}  // namespace
-
-ReadTrace parseTrace(std::string_view bytes, const TraceLimits& limits) {
-  if (bytes.size() > limits.mostBytes) return systemFailure(EFBIG);
-  return parse(bytes, limits);
-}
-
 ReadTrace readTrace(const std::string& path, const TraceLimits& limits) {
   // Not blocking, for the case that somebody put a pipe there.
-  const int descriptor = ::open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC);
-  if (descriptor < 0) return systemFailure(errno);
-  const std::unique_ptr<std::FILE, Closer> file(::fdopen(descriptor, "rb"));
-  if (file == nullptr) {
-    const int failure = errno;
-    ::close(descriptor);
-    return systemFailure(failure);
-  }
+  const Descriptor file(::open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
+  if (file.number < 0) return systemFailure(errno);
   struct stat status {};
-  if (::fstat(descriptor, &status) != 0) return systemFailure(errno);
+  if (::fstat(file.number, &status) != 0) return systemFailure(errno);
   if (!S_ISREG(status.st_mode)) return systemFailure(ENODEV);
-  if (static_cast<std::uint64_t>(status.st_size) > limits.mostBytes) return systemFailure(EFBIG);
-  return parse(file.get(), limits);
+  const auto size = static_cast<std::size_t>(status.st_size);
+  if (size > limits.mostBytes) return systemFailure(EFBIG);
+  const auto bytes = std::make_unique_for_overwrite<char[]>(size);
+  std::size_t taken = 0;
+  while (taken < size) {
+    const ssize_t more = ::read(file.number, bytes.get() + taken, size - taken);
+    if (more < 0 && errno != EINTR) return systemFailure(errno);
+    if (more == 0) break;  // somebody cut it
+    taken += more > 0 ? static_cast<std::size_t>(more) : 0;
+  }
+  return parseTrace({bytes.get(), taken}, limits);
 }
 
 }  // namespace tarn::trace_analysis

@@ -5,8 +5,8 @@
 // no end. Events without their partner, their time or a sensible duration give no interval. An interval's subsystem is
 // the first of the event's categories, up to the comma.
 //
-// The file is read as a stream. Its size, its events and the depth of its values are bounded; a file beyond the bounds,
-// one that isn't whole and one that isn't such a trace are failures. Nothing is thrown. Threads: one at a time.
+// The file is read into memory whole. Its size, its events and the depth of its values are bounded; a file beyond the
+// bounds, one that isn't whole and one that isn't such a trace are failures. Nothing is thrown. Threads: one at a time.
 #pragma once
 
 #include <cstddef>

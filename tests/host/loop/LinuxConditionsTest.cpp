@@ -76,6 +76,26 @@ TEST_F(LinuxConditionsTest, AWaitOnTheServerQueueIsToldAsDeliberate) {
   EXPECT_FALSE(running_.loop.progress().sample().waitingSince.has_value());
 }
 
+TEST_F(LinuxConditionsTest, ABlockOfTheServerQueueIsToldAsDeliberateWhileItIsHeld) {
+  running_.start();
+  const auto waitingSince = [this] { return running_.loop.progress().sample().waitingSince; };
+  running_.onQueue([&] {
+    const auto begin = running_.clock.monotonic();
+    const std::uint64_t steps = running_.loop.progress().sample().steps;
+    auto block = conditions_.blockOnPurpose();
+    ASSERT_TRUE(waitingSince().has_value());
+    EXPECT_GE(*waitingSince(), begin);
+    block.reset();
+    EXPECT_FALSE(waitingSince().has_value());
+    EXPECT_GT(running_.loop.progress().sample().steps, steps);
+  });
+}
+
+TEST_F(LinuxConditionsTest, ABlockOfAnotherThreadIsNotTold) {
+  const auto block = conditions_.blockOnPurpose();
+  EXPECT_FALSE(running_.loop.progress().sample().waitingSince.has_value());
+}
+
 TEST_F(LinuxConditionsTest, AWaitOnAnotherThreadIsNotTold) {
   const auto condition = conditions_.makeCondition();
   std::atomic<bool> told{false};

@@ -6,6 +6,7 @@
 #include <atomic>
 #include <future>
 #include <string>
+#include <thread>
 #include <vector>
 
 #include "tests/host/Eventually.h"
@@ -72,6 +73,93 @@ TEST_F(LinuxWorkQueuesTest, ABlockedQueueDoesNotHoldUpAnother) {
   finish(*other);
   release.set_value();
   finish(*blocked);
+}
+
+// All threads of the pool are busy, so that nobody else comes to what waits.
+TEST_F(LinuxWorkQueuesTest, HelpRunsWhatWaitsOnTheCallersThreadAsWorkOfTheQueue) {
+  std::promise<void> release;
+  const auto released = release.get_future().share();
+  std::atomic<std::size_t> busy{0};
+  std::vector<std::shared_ptr<platform::WorkQueue>> others;
+  for (std::size_t i = 0; i < LinuxWorkQueues::kThreads; ++i) {
+    others.push_back(make());
+    others.back()->async([&busy, released] {
+      ++busy;
+      released.wait();
+    });
+  }
+  ASSERT_TRUE(eventually([&] { return busy == LinuxWorkQueues::kThreads; }));
+  const auto queue = makeSuspendable();
+  std::vector<std::thread::id> threads;
+  bool current = false;
+  queue->asyncAtOnce([&] {
+    threads.push_back(std::this_thread::get_id());
+    current = queue->isCurrent();
+  });
+  queue->async([&] {
+    threads.push_back(std::this_thread::get_id());
+    queue->suspend(1h, [] {});
+  });
+  queue->async([&] { threads.emplace_back(); });
+  queue->help(0s);
+  EXPECT_EQ(threads, std::vector<std::thread::id>(2, std::this_thread::get_id()));
+  EXPECT_TRUE(current);
+  EXPECT_FALSE(queue->isCurrent());
+  queue->help(0s);  // suspended
+  EXPECT_EQ(threads.size(), 2U);
+  EXPECT_EQ(queue->waiting(), 1U);
+  queue->resume();
+  queue->help(0s);
+  EXPECT_EQ(threads.size(), 3U);
+  queue->help(0s);  // nothing waits
+  EXPECT_EQ(queue->waiting(), 0U);
+  release.set_value();
+  EXPECT_TRUE(queues_.settle(20s));
+}
+
+TEST_F(LinuxWorkQueuesTest, HelpWaitsForTheThreadThatRunsTheQueue) {
+  const auto queue = makeSuspendable();
+  std::promise<void> begun;
+  std::promise<void> release;
+  std::atomic<bool> over{false};
+  queue->async([&] {
+    begun.set_value();
+    release.get_future().wait();
+    over = true;
+  });
+  begun.get_future().wait();
+  std::thread releaser([&] { release.set_value(); });
+  queue->help(20s);
+  EXPECT_TRUE(over);
+  releaser.join();
+}
+
+TEST_F(LinuxWorkQueuesTest, HelpByWorkOfTheQueueItselfIsNone) {
+  const auto queue = makeSuspendable();
+  std::atomic<bool> helped{false};
+  queue->async([&] {
+    queue->help(1h);
+    helped = true;
+  });
+  EXPECT_TRUE(eventually([&] { return helped.load(); }));
+}
+
+TEST_F(LinuxWorkQueuesTest, HelpLeavesAQueueThatAThreadRuns) {
+  const auto queue = makeSuspendable();
+  std::promise<void> begun;
+  std::promise<void> release;
+  std::atomic<bool> ran{false};
+  queue->async([&] {
+    begun.set_value();
+    release.get_future().wait();
+  });
+  begun.get_future().wait();
+  queue->async([&ran] { ran = true; });
+  queue->help(0s);
+  EXPECT_FALSE(ran);
+  release.set_value();
+  EXPECT_TRUE(queues_.settle(20s));
+  EXPECT_TRUE(ran);
 }
 
 TEST_F(LinuxWorkQueuesTest, CountsWhatWaitsBehindRunningWork) {

@@ -5,6 +5,7 @@
 #include <utility>
 #include <vector>
 
+#include "telemetry/registration/BaseUnit.h"
 #include "telemetry/registration/TarnReportingRegistrationState.h"
 #include "telemetry/registration/TarnReportingSessionAudioRegistrationWorker.h"
 #include "tests/session/SessionFixture.h"
@@ -110,6 +111,187 @@ TEST_F(AudioRegistration, FirstSightingEnumeratesAtOnce) {
                                                                    {"Right", plist::Dictionary{{"serial", "R"}}},
                                                                    {"Case", plist::Dictionary{{"charge", 80}}}}}}}));
   EXPECT_EQ(platform_.defaults.value(kSuite, kInfoKey), plist::Value(*state_->registrationInfo()));
+}
+
+TEST_F(AudioRegistration, EveryLineHasItsLevelAndItsModule) {
+  const auto lines = [this] {
+    std::vector<std::string> texts;
+    for (const auto& entry : platform_.log.entries()) {
+      EXPECT_EQ(entry.category, "tarnrz");
+      const bool isDefault = entry.level == platform::LogLevel::Default;
+      EXPECT_TRUE(isDefault || entry.level == platform::LogLevel::Debug) << entry.message();
+      texts.push_back((isDefault ? "default " : "debug ") + std::string(entry.module) + ": " +
+                      entry.message().substr(0, 20));
+    }
+    platform_.log.clear();
+    return texts;
+  };
+  platform_.accessories.add(buds(now()));
+  platform_.log.clear();
+  worker_->start();
+  handle(kBuds);
+  const std::string ours = "TarnReportingSessionAudioRegistrationWorker: ";
+  EXPECT_EQ(lines(), (std::vector<std::string>{
+                         "debug " + ours + "Starting TarnReporti", "debug " + ours + "Time to next BT Enum",
+                         "debug BTAccess: BTAccess initialize", "debug BaseUnit: BaseUnit initialize",
+                         "default BaseUnit: Enumerate Bluetooth!"}));
+  platform_.defaults.set(kSuite, kNextKey, now() - 1);
+  worker_->stop();
+  const std::string publication = "TarnReportingRegistrationPublication: ";
+  EXPECT_EQ(lines(), (std::vector<std::string>{
+                         "debug " + ours + "Stopping TarnReporti", "default " + ours + "Time to next Invocat",
+                         "debug " + ours + "We could publish", "debug " + ours + "At least one active ",
+                         "debug " + ours + "entering rtcreportin", "default " + publication + "RTCReportingAgent fa",
+                         "debug " + publication + "Message Sent->"}));
+}
+
+TEST_F(AudioRegistration, EnumerationForgetsWhatTheOneBeforeFound) {
+  platform_.accessories.add(buds(1000));
+  handle(kBuds);
+  platform_.accessories.clear();
+  platform_.advance(std::chrono::minutes(2));
+  handle(kBuds);
+  EXPECT_EQ(*state_->registrationInfo(), plist::Dictionary());
+  platform_.accessories.add({{AccessoryPart::Right, {{"serial", "new"}}}});
+  platform_.advance(std::chrono::minutes(2));
+  handle(kBuds);
+  EXPECT_EQ(*state_->registrationInfo(),
+            (plist::Dictionary{
+                {"splunk", plist::Array{plist::Dictionary{{"Right", plist::Dictionary{{"serial", "new"}}}}}}}));
+}
+
+TEST_F(AudioRegistration, RecordsStandInTheOrderOfTheAccessories) {
+  platform_.accessories.add({});
+  platform_.accessories.add({{AccessoryPart::Left, {{"lastConnectedEpoch", 5}, {"serial", "L"}}}});
+  handle(kBuds);
+  EXPECT_EQ(
+      *state_->registrationInfo(),
+      (plist::Dictionary{{"splunk", plist::Array{plist::Dictionary{},
+                                                 plist::Dictionary{{"lastConnectedEpoch", 5},
+                                                                   {"Left", plist::Dictionary{{"serial", "L"}}}}}}}));
+}
+
+TEST_F(AudioRegistration, PartWithoutATimeLeavesThatOfTheOthers) {
+  platform_.accessories.add({{AccessoryPart::Left, {{"lastConnectedEpoch", 5}}}, {AccessoryPart::Right, {{"n", 1}}}});
+  handle(kBuds);
+  EXPECT_EQ(*state_->registrationInfo(),
+            (plist::Dictionary{{"splunk", plist::Array{plist::Dictionary{{"lastConnectedEpoch", 5},
+                                                                         {"Left", plist::Dictionary{}},
+                                                                         {"Right", plist::Dictionary{{"n", 1}}}}}}}));
+}
+
+TEST_F(AudioRegistration, BaseUnitWithoutQueriesHasNoDevices) {
+  BaseUnit unit(nullptr);
+  const auto info = std::make_shared<plist::Dictionary>();
+  unit.setRegistrationInfoParams(info);
+  EXPECT_EQ(unit.RegistrationInfoParams(), info);
+  EXPECT_FALSE(unit.enumerateBluetoothDevices());
+  EXPECT_EQ(unit.getDeviceCount(), 0);
+  EXPECT_FALSE(unit.isDeviceWithCase(0));
+  unit.loadParams(AccessoryPart::Left, 0);
+  EXPECT_TRUE(info->empty());
+}
+
+TEST_F(AudioRegistration, BaseUnitAsksOnlyForDevicesThatItCounted) {
+  platform_.accessories.add(buds(5, true));
+  BaseUnit unit(&platform_.accessories);
+  const auto info = std::make_shared<plist::Dictionary>();
+  unit.setRegistrationInfoParams(info);
+  ASSERT_FALSE(unit.enumerateBluetoothDevices());
+  EXPECT_EQ(unit.getDeviceCount(), 1);
+  EXPECT_TRUE(unit.isDeviceWithCase(0));
+  unit.loadParams(AccessoryPart::Left, 1);
+  EXPECT_TRUE(info->empty());
+  EXPECT_EQ(platform_.accessories.askedFor(), (std::vector<std::uint16_t>{}));
+  unit.loadParams(AccessoryPart::Left, 0);
+  EXPECT_EQ((*info)["splunk"].array().size(), 1U);
+}
+
+TEST_F(AudioRegistration, MinuteAndDayCountFromTheEndOfTheEnumeration) {
+  platform_.accessories.onEnumerate([this] { platform_.clock.advance(std::chrono::seconds(7)); });
+  const double before = now();
+  handle(kBuds);
+  EXPECT_EQ(stored(kCheckKey), before + 7 + 60);
+  platform_.advance(std::chrono::minutes(2));
+  platform_.accessories.failEnumeration(platform::PlatformError{5, "radio is off"});
+  const double again = now();
+  handle(kBuds);
+  EXPECT_EQ(stored(kCheckKey), again + 7 + kDay);
+}
+
+TEST_F(AudioRegistration, MomentOfTheNextEnumerationIsStoredBeforeTheInfo) {
+  handle(kBuds);
+  const auto writes = platform_.defaults.writes();
+  ASSERT_EQ(writes.size(), 2U);
+  EXPECT_EQ(writes[0].key, kCheckKey);
+  EXPECT_EQ(writes[1].key, kInfoKey);
+  platform_.advance(std::chrono::minutes(2));
+  platform_.accessories.failEnumeration(platform::PlatformError{5, "radio is off"});
+  handle(kBuds);
+  ASSERT_EQ(platform_.defaults.writes().size(), 3U);
+  EXPECT_EQ(platform_.defaults.writes()[2].key, kCheckKey);
+}
+
+TEST_F(AudioRegistration, MomentsAreLoadedOnce) {
+  handle(kBuds);
+  platform_.defaults.set(kSuite, kCheckKey, now() + kDay);
+  platform_.advance(std::chrono::seconds(60));
+  handle(kBuds);
+  EXPECT_EQ(platform_.accessories.enumerations(), 2U);
+  platform_.defaults.set(kSuite, kNextKey, now() + 10);
+  EXPECT_EQ(state_->nextInvocationEpoch(), now() + 10);
+  platform_.defaults.set(kSuite, kNextKey, now() + 20);
+  EXPECT_EQ(state_->nextInvocationEpoch(), now() + 10);
+}
+
+TEST_F(AudioRegistration, PublicationIsNotRepeatedAtTheNextStop) {
+  platform_.rtcReporting.setBackends(std::nullopt);
+  makeDue();
+  enumerate({buds(now())});
+  worker_->stop();
+  platform_.log.clear();
+  worker_->stop();
+  EXPECT_EQ(messages().back(), "Time to next Invocation: 86400.000000 seconds / 1.000000 days");
+  EXPECT_EQ(backendSessions().size(), 1U);
+}
+
+TEST_F(AudioRegistration, WeekCountsFromTheMomentOfTheSending) {
+  platform_.rtcReporting.completions().set(ReplyFault::Hold);
+  makeDue();
+  enumerate({buds(now())});
+  worker_->stop();
+  platform_.advance(std::chrono::hours(3));
+  platform_.rtcReporting.completions().deliverHeld();
+  EXPECT_EQ(stored(kNextKey), now() + kWeek);
+}
+
+TEST_F(AudioRegistration, TimestampOfARecordIsSent) {
+  worker_->setupRTCReporterInterface({plist::Dictionary{{"tarnreporting_timestamp", 5}, {"n", 1}}});
+  ASSERT_EQ(backendSessions().size(), 1U);
+  ASSERT_EQ(backendSessions()[0].messages.size(), 1U);
+  EXPECT_EQ(backendSessions()[0].messages[0].payload, (plist::Dictionary{{"tarnreporting_timestamp", 5}, {"n", 1}}));
+}
+
+TEST_F(AudioRegistration, CategoryIsCutToItsLowHalf) {
+  const auto category = TarnReportingSessionAudioRegistrationWorker::retrieveRTCReportingCategoryFromCategory;
+  EXPECT_EQ(category(AudioEventCategory{0x10000005}), 5);
+  EXPECT_EQ(category(AudioEventCategory{0xFFFFFFFF}), 0xFFFF);
+  worker_->setupRTCReporterInterface({});
+  worker_->_sendMessage(*message({{"n", 1}}, AudioEventCategory{0x10000005}, AudioEventType{65535}));
+  ASSERT_EQ(backendSessions().size(), 1U);
+  ASSERT_EQ(backendSessions()[0].messages.size(), 1U);
+  EXPECT_EQ(backendSessions()[0].messages[0].category, 5);
+  EXPECT_EQ(backendSessions()[0].messages[0].type, 65535);
+  EXPECT_TRUE(platform_.log.contains(platform::LogLevel::Default, "} : category 268435461 : type 65535"));
+}
+
+TEST_F(AudioRegistration, NothingIsSentWithoutABackendSession) {
+  worker_->_sendMessage(*message({{"n", 1}}));
+  platform_.rtcReporting.setMakesSessions(false);
+  worker_->setupRTCReporterInterface({});
+  worker_->_sendMessage(*message({{"n", 1}}));
+  EXPECT_TRUE(backendSessions().empty());
+  EXPECT_TRUE(platform_.defaults.writes().empty());
 }
 
 TEST_F(AudioRegistration, SignatureInsideAListOfDevicesCounts) {
@@ -436,16 +618,16 @@ TEST_F(AudioRegistration, StoreThatCannotBeWrittenIsLoggedAndTheProcessGoesOn) {
 }
 
 TEST_F(AudioRegistration, WorkWeekOfTheEpochIsOneEastOfGreenwichAndOne) {
-  EXPECT_EQ(TarnReportingSessionAudioRegistrationWorker::convertEpochToWorkWeek(0), 1);
+  EXPECT_EQ(TarnReportingSessionAudioRegistrationWorker::_convertEpochToWorkWeek(0), 1);
   platform_.localCalendar.setSecondsEastOfUtc(14 * 3600);
-  EXPECT_EQ(TarnReportingSessionAudioRegistrationWorker::convertEpochToWorkWeek(0), 1);
+  EXPECT_EQ(TarnReportingSessionAudioRegistrationWorker::_convertEpochToWorkWeek(0), 1);
 }
 
 TEST_F(AudioRegistration, WorkWeekWrapsAtThirtyTwoBits) {
   using Worker = TarnReportingSessionAudioRegistrationWorker;
-  EXPECT_EQ(Worker::convertEpochToWorkWeek((1LL << 32) + 8 * 86400), Worker::convertEpochToWorkWeek(8 * 86400));
-  EXPECT_EQ(Worker::convertEpochToWorkWeek(-1), Worker::convertEpochToWorkWeek((1LL << 32) - 1));
-  EXPECT_EQ(Worker::convertEpochToWorkWeek("691200 or so"), 2);
+  EXPECT_EQ(Worker::_convertEpochToWorkWeek((1LL << 32) + 8 * 86400), Worker::_convertEpochToWorkWeek(8 * 86400));
+  EXPECT_EQ(Worker::_convertEpochToWorkWeek(-1), Worker::_convertEpochToWorkWeek((1LL << 32) - 1));
+  EXPECT_EQ(Worker::_convertEpochToWorkWeek("691200 or so"), 2);
 }
 
 }  // namespace

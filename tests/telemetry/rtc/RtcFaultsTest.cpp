@@ -162,6 +162,23 @@ TEST_F(RtcFaults, LateCompletionWithoutAListLeavesTheWorkerInert) {
   EXPECT_EQ(lines().back(), "default Session never started. handleMessage");
 }
 
+TEST_F(RtcFaults, CompletionWithoutAListTakesBackWhatAnEarlierOneFound) {
+  completions().set(ReplyFault::Hold);
+  const auto session = makeTyped(AudioServiceType::Haptics);
+  const auto worker = TarnReportingSessionRtcWorker::initWithSession(session);
+  worker->start();
+  platform_.advance(9s);  // the first completion will be late
+  platform_.rtcReporting.setBackends({});
+  worker->start();
+  platform_.runUntilIdle();
+  EXPECT_EQ(completions().deliverHeld(), 2U);
+  EXPECT_FALSE(worker->getRTCReportingStartedState());
+  EXPECT_TRUE(worker->started());  // tells alone that there was a list once
+  platform_.runUntilIdle();
+  EXPECT_EQ(lines().back(), "default failed to find backend");
+  EXPECT_TRUE(platform_.rtcReporting.sessions().at(1).released);
+}
+
 TEST_F(RtcFaults, SignalOfALateCompletionIsKeptForTheNextStart) {
   completions().set(ReplyFault::Hold);
   const auto session = startSession();
@@ -228,6 +245,36 @@ TEST_F(RtcFaults, StopRightBehindAStartStillMirrorsTheSession) {
   EXPECT_EQ(made.messages[0].payload, (plist::Dictionary{{"Tarn_Session_Summary_Event", "3"}}));
   EXPECT_EQ(made.flushes, 1U);
   EXPECT_TRUE(made.released);
+}
+
+// A start that is still to come would complete behind the stop, and keep the worker out of the next period.
+TEST_F(RtcFaults, StopHelpsAStartThatNoThreadHasComeTo) {
+  platform_.workQueues.setHelps(true);
+  const auto session = makeTyped(AudioServiceType::Haptics);
+  for (int period = 0; period < 3; ++period) {
+    session->start();
+    session->sendMessage(message({{"n", period}}));
+    EXPECT_EQ(platform_.rtcReporting.sessions().size(), static_cast<std::size_t>(period));
+    session->stop();
+    ASSERT_EQ(platform_.rtcReporting.sessions().size(), static_cast<std::size_t>(period) + 1);
+    EXPECT_FALSE(workerOf(*session).started());
+    EXPECT_EQ(platform_.rtcReporting.sessions().back().flushes, 0U);  // the stop itself is for the queue
+  }
+  platform_.runUntilIdle();
+  for (const auto& made : platform_.rtcReporting.sessions()) {
+    EXPECT_EQ(made.messages.size(), 2U);
+    EXPECT_EQ(made.flushes, 1U);
+  }
+}
+
+TEST_F(RtcFaults, StopOfALiveMirrorHelpsNothing) {
+  const auto session = startSession();
+  platform_.workQueues.setHelps(true);
+  session->sendMessage(message({{"n", 1}}));
+  session->stop();
+  EXPECT_TRUE(onlySession().messages.empty());
+  platform_.runUntilIdle();
+  EXPECT_EQ(onlySession().messages.size(), 2U);
 }
 
 TEST_F(RtcFaults, WorkerMayBeGoneWhileItsQueueWorks) {

@@ -4,6 +4,7 @@
 #include <map>
 #include <random>
 
+#include "telemetry/rtc/TarnReportingRtcMirror.h"
 #include "telemetry/rtc/TarnReportingRtcSummary.h"
 #include "tests/support/Seeds.h"
 #include "tests/telemetry/rtc/RtcFixture.h"
@@ -52,6 +53,25 @@ TEST_F(RtcSummary, BeginsWithTheEventsOwnKeyThenKeysAsTheyWereFirstSeen) {
   }
   EXPECT_EQ(keys, (std::vector<std::string>{std::string(kSummaryEvent), "b", "invalid_timestamp", "audiotag",
                                             "HostApplicationDisplayID", "a"}));
+}
+
+TEST_F(RtcSummary, ServiceTypeHasSixteenBitsWithoutASign) {
+  const auto text = [](std::uint16_t type) {
+    return TarnReportingMakeRtcSummary(AudioServiceType{type}, {}).payload[kSummaryEvent].asText();
+  };
+  EXPECT_EQ(text(0), "0");
+  EXPECT_EQ(text(256), "256");
+  EXPECT_EQ(text(32768), "32768");
+  EXPECT_EQ(text(65535), "65535");
+}
+
+TEST_F(RtcSummary, ServiceTypeIsThatOfTheStop) {
+  const auto session = startSession(AudioServiceType::Haptics);
+  session->setServiceType(AudioServiceType::LongFormAudio);
+  session->stop();
+  session->setServiceType(AudioServiceType::Telephony);
+  platform_.runUntilIdle();
+  EXPECT_EQ(onlySession().messages.back().payload[kSummaryEvent].text(), "7");
 }
 
 TEST_F(RtcSummary, TimestampStaysOnAnInternalBuild) {
@@ -160,6 +180,19 @@ TEST_F(RtcSummary, EmptyMessageListSendsNoneButFlushesAndClears) {
   EXPECT_EQ(count("debug stopping and setting session to nil"), 1U);
 }
 
+TEST_F(RtcSummary, LogWithoutAMessageForTheWorkerIsNotAnEmptyOne) {
+  const auto session = makeTyped(AudioServiceType::Haptics);
+  const auto elsewhere = message({{"n", 1}});
+  elsewhere->setDestinationWorkers({"TarnReportingSessionTallyWorker"});
+  session->sendMessage(elsewhere);
+  const auto worker = TarnReportingSessionRtcWorker::initWithSession(session);
+  worker->start();
+  worker->stop();
+  platform_.runUntilIdle();
+  ASSERT_EQ(onlySession().messages.size(), 1U);
+  EXPECT_EQ(onlySession().messages[0].payload, (plist::Dictionary{{kSummaryEvent, "3"}}));
+}
+
 TEST_F(RtcSummary, EveryRecordOfTheLogIsCopiedAndNoneIsChanged) {
   const auto session = startSession();
   const auto addressed = message({{"n", 1}, {"tarnreporting_timestamp", now()}});
@@ -187,6 +220,24 @@ TEST_F(RtcSummary, IsCutAtItsLimitBetweenTwoMessages) {
   EXPECT_EQ(cut.payload["a"].text(), "xxxxx,xxxxx");
   EXPECT_EQ(cut.payload["b"].text(), "0,1");
   EXPECT_EQ(TarnReportingMakeRtcSummary(AudioServiceType::Generic, messages, 44).payload["b"].text(), "0,1,2");
+}
+
+TEST_F(RtcSummary, LimitLeavesRoomBelowTheLongestTextOfTheService) {
+  EXPECT_EQ(TarnReportingRtcSummary::kLongestText, 134'217'728U);
+}
+
+TEST_F(RtcSummary, CutSummaryIsLoggedWithTheSession) {
+  const auto session = makeTyped(AudioServiceType::Haptics);
+  TarnReportingSessionRtcWorker worker(session, std::make_shared<TarnReportingRtcMirror>(platform_.rtcReporting, 100));
+  session->start();
+  worker.start();
+  for (int n = 0; n < 3; ++n) {
+    session->sendMessage(message({{"n", n}, {"text", std::string(100, 'x')}}));
+  }
+  worker.stop();
+  platform_.runUntilIdle();
+  EXPECT_EQ(count("error rtc summary event is cut, the session has too many messages. reporterID=7"), 1U);
+  EXPECT_EQ(platform_.rtcReporting.sessions().back().messages.back().payload["n"].text(), "0");
 }
 
 TEST_F(RtcSummary, KeysCountTowardsTheLimit) {

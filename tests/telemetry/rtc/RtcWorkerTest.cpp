@@ -1,6 +1,7 @@
 // The Rtc worker on a service that answers as it should: what it is told, in which order, and what is logged.
 #include <algorithm>
 
+#include "telemetry/rtc/TarnReportingRtcMirror.h"
 #include "tests/telemetry/rtc/RtcFixture.h"
 
 namespace tarn {
@@ -154,6 +155,11 @@ TEST_F(RtcWorker, SingleMessageSessionAnnouncesThePlainServiceName) {
   EXPECT_EQ(sessionWith({}, AudioServiceType::Haptics, Mode::SingleMessage).userInfo["serviceName"].text(), "haptics");
 }
 
+TEST_F(RtcWorker, ConfigurationOverwritesTheNameOfASingleMessageSessionToo) {
+  const RtcSession made = sessionWith({{"serviceName", "mine"}}, AudioServiceType::Haptics, Mode::SingleMessage);
+  EXPECT_EQ(made.userInfo["serviceName"].text(), "mine");
+}
+
 TEST_F(RtcWorker, ConfigurationIsAddedToTheUserInfoAndOverwritesIt) {
   const RtcSession made = sessionWith({{"extra", 5}, {"serviceName", "mine"}, {"TarnReportingSessionID", "none"}});
   EXPECT_EQ(made.userInfo, (plist::Dictionary{{"clientName", "sys.oxbow.tarnkit"},
@@ -255,6 +261,14 @@ TEST_F(RtcWorker, TimestampGoesToTheServiceOnAnInternalBuild) {
   EXPECT_EQ(onlySession().messages.at(0).payload["tarnreporting_timestamp"].asDouble(), now());
 }
 
+TEST_F(RtcWorker, TimestampIsGoneEvenWhenThereIsNoSessionToSendThrough) {
+  const auto worker = TarnReportingSessionRtcWorker::initWithSession(makeTyped(AudioServiceType::Haptics));
+  const auto record = message({{"tarnreporting_timestamp", 5}, {"n", 1}});
+  worker->_sendMessage(record);
+  EXPECT_EQ(record->message(), (plist::Dictionary{{"n", 1}}));
+  EXPECT_EQ(lines(), (Texts{"debug entering rtcreporting _sendMessage"}));
+}
+
 TEST_F(RtcWorker, TimestampOfAnyKindIsRemoved) {
   const auto session = startSession();
   for (const plist::Value& stamp : {plist::Value("soon"), plist::Value(true), plist::Value(plist::Dictionary{})}) {
@@ -305,6 +319,19 @@ TEST_F(RtcWorker, SessionThatIsStartedAgainGetsASessionOfItsOwn) {
     EXPECT_EQ(each.flushes, 1U);
   }
   EXPECT_EQ(made[1].sessionInfo["hierarchyToken"].text(), "token-2");
+}
+
+TEST_F(RtcWorker, TokenIsHeldWhileTheServicesSessionIs) {
+  const auto session = makeTyped(AudioServiceType::Haptics);
+  const auto mirror = std::make_shared<TarnReportingRtcMirror>(platform_.rtcReporting);
+  TarnReportingSessionRtcWorker worker(session, mirror);
+  EXPECT_EQ(mirror->rtcReportingAgentToken(), std::nullopt);
+  worker.start();
+  platform_.runUntilIdle();
+  EXPECT_EQ(mirror->rtcReportingAgentToken(), "token-1");
+  worker.stop();
+  platform_.runUntilIdle();
+  EXPECT_EQ(mirror->rtcReportingAgentToken(), std::nullopt);
 }
 
 TEST_F(RtcWorker, WorkerThatWasNeverStartedLogsSoAtItsStop) {

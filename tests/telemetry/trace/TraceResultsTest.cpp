@@ -68,9 +68,9 @@ TEST_F(TraceResults, NamesThatAreNoTextsCountAsNone) {
 }
 
 TEST_F(TraceResults, GeneratedNameHoldsTheApplicationWithoutSlashes) {
-  play({{"KvHostApplicationDisplayID", "org/example"}});
+  play({{"KvHostApplicationDisplayID", std::string_view("org/ex\0ample", 12)}});
   EXPECT_TRUE(
-      platform_.fileSystem.exists(std::string(kDirectory) + "/20240131-142501+0100-tarnkit-org_example-test.pdj"));
+      platform_.fileSystem.exists(std::string(kDirectory) + "/20240131-142501+0100-tarnkit-org_ex_ample-test.pdj"));
 }
 
 TEST_F(TraceResults, NameOfTheContentIsThatOfTheSessionsFirstStart) {
@@ -100,6 +100,38 @@ TEST_F(TraceResults, IntervalsOfTheAudioSubsystemsAreValuesWithTheirSums) {
   EXPECT_EQ(keyVariables(), (Strings{"a", "b"}));
   EXPECT_TRUE(platform_.log.contains(LogLevel::Debug, "name:a time:250.000000 ms"));
   EXPECT_FALSE(platform_.log.contains("name:other"));
+}
+
+TEST_F(TraceResults, SubsystemsMayHoldTheAudioOnesAnywhere) {
+  analysis().setIntervals({interval("a", 1, "sys.oxbow.tarnkit"), interval("b", 1, "the.sys.oxbow.tarnkit"),
+                           interval("c", 1, "sys.oxbow.tarnkit.reporting"), interval("d", 1, "sys.oxbow.audio.hal"),
+                           interval("e", 1, "sys.oxbow.tarn"), interval("f", 1, "sys.oxbow.audi")});
+  play();
+  EXPECT_EQ(keyVariables(), (Strings{"a", "b", "c", "d"}));
+}
+
+TEST_F(TraceResults, SignpostsComeBeforeProbesAndAllValuesBeforeTheExtensions) {
+  analysis().setIntervals({interval("a", 0.001)});
+  analysis().setProbes({probe("p", {0.002})});
+  play();
+  EXPECT_EQ(file().values, (Values{{"a", 1}, {"a Total", 1}, {"a AVG", 1}, {"p", 2}, {"p Total", 2}, {"p AVG", 2}}));
+  for (const auto& extension : file().extensions) EXPECT_EQ(extension.valuesBefore, 6U);
+}
+
+TEST_F(TraceResults, TraceThatLacksEventsIsSaidToBeCut) {
+  platform_.performanceTrace.setEventsLeftOut(12345);
+  play();
+  ASSERT_EQ(file().extensions.size(), 3U);
+  EXPECT_EQ(file().extensions[2].name, "@tdg-perf.trace");
+  EXPECT_EQ(file().extensions[2].members,
+            (std::vector<std::pair<std::string, std::string>>{{"eventsLeftOut", "12345"}}));
+  EXPECT_TRUE(file().extensions[2].ended);
+}
+
+TEST_F(TraceResults, OneEventThatIsLackingIsTold) {
+  platform_.performanceTrace.setEventsLeftOut(1);
+  play();
+  EXPECT_EQ(file().extensions.size(), 3U);
 }
 
 TEST_F(TraceResults, EventsOfProbesAreValuesUnderTheProbesName) {
@@ -233,6 +265,14 @@ TEST_F(TraceResults, ItemsThatDescribeNoProbeAreLoggedAndLeftOut) {
   EXPECT_TRUE(file().closed);
 }
 
+TEST_F(TraceResults, ArrayOfItemsThatDescribeNoProbeIsAnalysedWithoutProbes) {
+  describeProbes("<array><array/></array>");
+  play();
+  EXPECT_EQ(errors(), Strings{"unsupported class array of a probe in /device/probes.plist"});
+  EXPECT_EQ(analysisLoads(), 1U);
+  EXPECT_TRUE(file().closed);
+}
+
 TEST_F(TraceResults, RootOfAnotherClassIsLogged) {
   const std::vector<std::pair<std::string, std::string>> cases{{"<string>a</string>", "string"},
                                                                {"<integer>1</integer>", "integer"},
@@ -276,6 +316,13 @@ TEST_F(TraceResults, DescriptionsThatCannotBeReadAreLogged) {
 TEST_F(TraceResults, LibraryIsToldThatItsResultsAreKnownToBeNoPromise) {
   play();
   EXPECT_FALSE(platform_.processEnvironment.value("APPROVED_BY_SKEIN_TEAM").value_or("").empty());
+}
+
+TEST_F(TraceResults, LibraryIsToldSoBeforeItIsLoaded) {
+  std::optional<std::string> seen;
+  analysis().onLoad([&] { seen = platform_.processEnvironment.value("APPROVED_BY_SKEIN_TEAM"); });
+  play();
+  EXPECT_TRUE(seen.has_value());
 }
 
 TEST_F(TraceResults, EnvironmentThatRefusesIsLoggedAndTheAnalysisTriedAllTheSame) {

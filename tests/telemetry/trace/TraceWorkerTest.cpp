@@ -1,7 +1,9 @@
 // The trace worker and its trace: when there is one, how it begins and ends, and what comes of a facility that errs.
+#include <functional>
 #include <mutex>
 #include <thread>
 
+#include "telemetry/trace/TarnReportingTraceRecording.h"
 #include "tests/telemetry/trace/TraceFixture.h"
 
 namespace tarn {
@@ -142,6 +144,46 @@ TEST_F(TraceWorker, WaitsFifteenSecondsForTheStartAndAHundredAndEightyForTheEnd)
   EXPECT_TRUE(file().closed);
 }
 
+TEST_F(TraceWorker, WakeUpAtTheVeryEndOfTheTimeIsTheEnd) {
+  facility().callbacks().set(ReplyFault::Hold);
+  platform_.conditions.onWait([this](auto) {
+    platform_.clock.advance(5s);
+    return WaitOutcome::Wakes;
+  });
+  makeTestSession()->start();
+  EXPECT_EQ(waits(), (std::vector<double>{15, 10, 5}));
+  EXPECT_EQ(errors(), Strings{kStartTimedOut});
+}
+
+// A condition whose every wait says that the time is up.
+class ImpatientCondition final : public platform::Condition {
+ public:
+  explicit ImpatientCondition(std::function<void()> meanwhile) : meanwhile_(std::move(meanwhile)) {}
+  void lock() override { mutex_.lock(); }
+  void unlock() override { mutex_.unlock(); }
+  void signal() override {}
+  bool waitFor(std::chrono::duration<double>) override {
+    mutex_.unlock();
+    meanwhile_();
+    mutex_.lock();
+    return false;
+  }
+
+ private:
+  const std::function<void()> meanwhile_;
+  std::mutex mutex_;
+};
+
+TEST_F(TraceWorker, AnswerThatComesWhileTheTimeRunsOutCounts) {
+  facility().callbacks().set(ReplyFault::Hold);
+  const auto recording = std::make_shared<TarnReportingTraceRecording>(
+      facility().createSession({}),
+      std::make_shared<ImpatientCondition>([this] { facility().callbacks().deliverHeld(); }));
+  EXPECT_TRUE(recording->start());
+  EXPECT_EQ(recording->stop(), TarnReportingTraceRecording::End::Completed);
+  EXPECT_TRUE(errors().empty());
+}
+
 TEST_F(TraceWorker, WakeUpWithoutAnAnswerDoesNotProlongTheWait) {
   facility().callbacks().set(ReplyFault::Hold);
   platform_.conditions.onWait([this](auto) {
@@ -256,6 +298,67 @@ TEST_F(TraceWorker, CompletionWithAnErrorLeavesNoTraceToAnalyse) {
   EXPECT_TRUE(platform_.log.contains("Starting Skein Process Trace. Path: (null)"));
   EXPECT_TRUE(facility().traces().at(0).released);
   EXPECT_TRUE(platform_.perfDataWriters.files().empty());
+}
+
+TEST_F(TraceWorker, CompletionTakesTheDelegateAway) {
+  for (const bool fails : {false, true}) {
+    if (fails) facility().failCompletion(PlatformError{28, "No space left on device"});
+    const auto session = makeTestSession();
+    session->start();
+    EXPECT_TRUE(facility().traces().back().hasDelegate);
+    session->stop();
+    EXPECT_FALSE(facility().traces().back().hasDelegate) << fails;
+  }
+}
+
+TEST_F(TraceWorker, SecondStartLeavesTheTraceThatRuns) {
+  const auto session = makeTestSession();
+  session->start();
+  auto& worker = dynamic_cast<TarnReportingSessionTraceWorker&>(workerOf(*session));
+  EXPECT_TRUE(worker.start());
+  EXPECT_EQ(facility().traces().size(), 1U);
+  EXPECT_EQ(facility().traces()[0].starts, 1U);
+}
+
+TEST_F(TraceWorker, SessionThatIsNoTestAnyMoreIsNotStopped) {
+  const auto session = makeTestSession();
+  session->start();
+  session->setServiceType(AudioServiceType::Generic);
+  session->stop();
+  EXPECT_EQ(facility().traces().at(0).stops, 0U);
+  EXPECT_TRUE(platform_.perfDataWriters.files().empty());
+}
+
+TEST_F(TraceWorker, WorkerWithoutItsSessionDoesNothing) {
+  auto session = makeTestSession();
+  const auto idle = TarnReportingSessionTraceWorker::initWithSession(session);
+  const auto tracing = TarnReportingSessionTraceWorker::initWithSession(session);
+  ASSERT_TRUE(tracing->start());
+  session.reset();
+  EXPECT_FALSE(idle->start());
+  tracing->stop();
+  EXPECT_EQ(facility().traces().size(), 1U);
+  EXPECT_EQ(facility().traces()[0].stops, 0U);
+}
+
+TEST_F(TraceWorker, EvaluationIsAnnouncedAsABlockOnPurposeAndTheWaitsAreNotPartOfIt) {
+  bool blockedWhileWaiting = false;
+  answerInWaits();
+  const auto session = makeTestSession();
+  session->start();
+  platform_.conditions.onWait([&](auto) {
+    blockedWhileWaiting = platform_.conditions.isBlockedOnPurpose();
+    facility().callbacks().deliverHeld();
+    return WaitOutcome::TimesOut;
+  });
+  bool blockedWhileReading = false;
+  platform_.traceAnalysis.onLoad([&] { blockedWhileReading = platform_.conditions.isBlockedOnPurpose(); });
+  EXPECT_EQ(platform_.conditions.blocks(), 0U);
+  session->stop();
+  EXPECT_FALSE(blockedWhileWaiting);
+  EXPECT_TRUE(blockedWhileReading);
+  EXPECT_EQ(platform_.conditions.blocks(), 1U);
+  EXPECT_FALSE(platform_.conditions.isBlockedOnPurpose());
 }
 
 TEST_F(TraceWorker, EachPeriodHasATraceAndAFileOfItsOwn) {
