@@ -8,6 +8,7 @@ import json
 import os
 import re
 import shlex
+import shutil
 import subprocess
 from concurrent.futures import ThreadPoolExecutor
 
@@ -25,6 +26,8 @@ class Builder:
         self.root, self.build, self.jobs = root, build, jobs
         self.place = os.path.join(build, "mutate", folder)
         self.tree = os.path.join(self.place, "tree")
+        self.headers = set()  # that hold mutants
+        self.made = set()  # the tests' objects that were compiled with them
         with open(os.path.join(build, "compile_commands.json"), encoding="utf-8") as file:
             self.commands = {os.path.realpath(entry["file"]): entry for entry in json.load(file)}
 
@@ -53,6 +56,8 @@ class Builder:
         words[at:at] = [*LAX, "-include", os.path.join(HERE, "selector.h")]
         first = next(at for at, word in enumerate(words) if word.startswith("-") and at > 0)
         words.insert(first, "-I" + self.tree)
+        if shutil.which("ccache") and "ccache" not in words[0]:
+            words.insert(0, "ccache")  # the tests' objects stay the same from run to run
         done = subprocess.run(words, cwd=entry["directory"], capture_output=True, text=True, errors="replace",
                               check=False, env={**os.environ, "LC_ALL": "C"})
         return done.stdout + done.stderr if done.returncode != 0 else ""
@@ -80,6 +85,7 @@ class Builder:
                                         todo))
             failed = [(source, output) for source, output in zip(todo, outputs) if output]
             if not failed:
+                self.headers = {path for path in alive if not path.endswith(".cpp")}
                 return dropped
             bad = set()
             for _, output in failed:
@@ -123,6 +129,22 @@ class Builder:
                    os.path.join(HERE, "selector.cpp"), "-o", output])
         return output
 
+    def with_mutated_headers(self, name):
+        """The test's object, compiled anew when it includes a header that holds mutants: it may be inline there."""
+        known = subprocess.run(["ninja", "-C", self.build, "-t", "deps", name], check=True, capture_output=True,
+                               text=True).stdout.split()
+        known = {os.path.realpath(os.path.join(self.build, each)) for each in known}
+        source = next((each for each in known if each in self.commands), None)
+        if source is None or not known & self.headers:
+            return name
+        output = self.object_of(source)
+        if output not in self.made:
+            self.made.add(output)
+            if self.compile(source, source, output):
+                self.made.discard(output)  # it wants one of the header's values at compile time
+                return name
+        return output
+
     def link(self, program, objects, output):
         """The test program as ninja links it, with these objects before its own."""
         commands = subprocess.run(["ninja", "-C", self.build, "-t", "commands", program], check=True,
@@ -133,6 +155,7 @@ class Builder:
         words = words[words.index("&&") + 1:] if words[0] == ":" else words
         words = words[:words.index("&&")] if "&&" in words else words
         words[words.index("-o") + 1] = output
+        words = [self.with_mutated_headers(word) if word.endswith(".o") else word for word in words]
         first = next(at for at, word in enumerate(words) if word.endswith(".o"))
         words[first:first] = objects
         os.makedirs(os.path.dirname(output), exist_ok=True)

@@ -90,11 +90,13 @@ class Campaign:
         # Cheap ones of every program before the whole of any.
         for program, tests, milliseconds in sorted(plans, key=lambda plan: plan[2]):
             result = "survived"
-            if not run(program.path, tests, mutant.id, 8 + 6 * milliseconds / 1000, self.seed)[0]:
+            if not run(program.path, tests, mutant.id, 3 + 8 * milliseconds / 1000, self.seed)[0]:
                 result = "caught"
                 break
         with self.lock:
             self.done += 1
+            if result != "caught":
+                self.say(f"{result}: {os.path.basename(mutant.file)}:{mutant.line}: {mutant.change()}")
             if self.done % 100 == 0:
                 self.say(f"{self.done} of {total}")
         return result

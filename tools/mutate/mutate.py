@@ -136,8 +136,7 @@ def report(folder, fates, accepted, options):
     for mutant, fate in left:
         mark = "new     " if (mutant, fate) in new else "accepted"
         where = f"{os.path.relpath(mutant.file, options.root)}:{mutant.line}"
-        kind = "" if mutant.kind == "expression" else f" [{mutant.kind}]"
-        print(f"{mark} {fate:11} #{mutant.id} {where}{kind}: {mutant.change()}")
+        print(f"{mark} {fate:11} #{mutant.id} {where}: {mutant.change()}")
     if options.entries:
         print("\n".join(as_entry(mutant) for mutant, _ in new))
     share = 1 - len(left) / len(fates) if fates else 1
@@ -178,8 +177,8 @@ def main(arguments):
         folder = Folder(name, folders.FOLDERS[name], options)
         if options.list:
             for each in folder.chosen:
-                kind = each.kind + (", built" if each.built else "")
-                print(f"#{each.id} {os.path.relpath(each.file, options.root)}:{each.line} ({kind}): {each.change()}")
+                how = " (built)" if each.built else ""
+                print(f"#{each.id} {os.path.relpath(each.file, options.root)}:{each.line}{how}: {each.change()}")
             print(f"{name}: {len(folder.chosen)} mutants")
             continue
         good = report(folder, folder.run(), accepted, options) and good

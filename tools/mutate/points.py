@@ -39,6 +39,7 @@ class Mutant:
     after: str
     kind: str  # "expression", "removed", "swapped"; `built` tells what needs a build of its own
     built: bool = False
+    truth: bool = False  # what stands there is true or false, whatever its type
     line: int = 0
     text: str = ""  # the whole line, without its indentation
     occurrence: int = 1
@@ -46,6 +47,10 @@ class Mutant:
     mate: tuple = field(default=(), repr=False)  # of a swap: the range of the statement that follows
 
     def change(self):
+        if self.kind == "removed":
+            return f"{shown(self.before)} left out"
+        if self.kind == "swapped":
+            return f"{shown(self.before)} after {shown(self.after[:-len(self.before)])}"
         return f"{shown(self.before)} -> {shown(self.after)}"
 
 
@@ -61,12 +66,12 @@ class Finder:
         self.files = files
         self.found = {}
 
-    def add(self, path, start, end, after, kind="expression", built=False, mate=()):
+    def add(self, path, start, end, after, kind="expression", built=False, truth=False, mate=()):
         text = self.files[path]
         before = text[start:end]
         key = (path, start, end, after, kind)
         if before and before != after and key not in self.found:
-            self.found[key] = Mutant(path, start, end, before, after, kind, built, mate=mate)
+            self.found[key] = Mutant(path, start, end, before, after, kind, built, truth, mate=mate)
 
     def parse(self, source, arguments):
         unit = Index.create().parse(source, args=arguments)
@@ -139,11 +144,12 @@ class Finder:
             if found in ARITHMETIC and kind == Kind.BINARY_OPERATOR and is_number(left) and is_number(right):
                 others += ARITHMETIC[found]
         for other in others:
-            self.add(path, start, end, f"{text[start:between[0]]} {other} {text[between[1]:end]}", built=built)
+            self.add(path, start, end, f"{text[start:between[0]]} {other} {text[between[1]:end]}", built=built,
+                     truth=found in RELATIONS or found in LOGICAL)
 
     def unary(self, cursor, path, start, end, text, built):
         if text.startswith("!"):
-            self.add(path, start, end, f"({text[1:]})", built=built)
+            self.add(path, start, end, f"({text[1:]})", built=built, truth=True)
         elif text.startswith("-") and not text.startswith("--") and is_number(cursor):
             self.add(path, start, end, f"({text[1:]})", built=built)
         elif is_number(cursor):
@@ -187,7 +193,7 @@ class Finder:
             if between in RELATIONS or between in ("=",):
                 return
         if not text.startswith("!") or "&&" in text or "||" in text:
-            self.add(path, start, end, f"!({text})")
+            self.add(path, start, end, f"!({text})", truth=True)
 
     def statements(self, cursors, path, in_block):
         text = self.files[path]

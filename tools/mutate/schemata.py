@@ -48,8 +48,10 @@ def render(text, start, end, places, edits, skips):
 def changed(original, text, mutants, skip):
     """One place: `original` holds the mutants further inside. No other mutant is on where one of these is."""
     expressions = [each for each in mutants if each.kind == "expression"]
+    # Both sides must be of one type, or the compiler converts one to the other.
+    cast = "static_cast<bool>" if any(each.truth for each in expressions) else ""
     for mutant in reversed(expressions):
-        original = f"({ASK}({mutant.id}) ? ({one_line(mutant.after)}) : ({original}))"
+        original = f"({ASK}({mutant.id}) ? {cast}({one_line(mutant.after)}) : {cast}({original}))"
     if not skip and len(expressions) == len(mutants):
         return original
     off = [mutant for mutant in mutants if mutant.kind == "removed"] + ([skip] if skip else [])
