@@ -30,9 +30,7 @@ class TarnReportingMessageFields {
   // `source`: a payload, or whatever else has values under keys.
   template <class Source>
   TarnReportingMessageFields(const Keys& keys, const Source& source) noexcept {
-    for (std::size_t i = 0; i < kCount; ++i) {
-      values_[i] = source.get(keys[i]);
-    }
+    std::transform(keys.begin(), keys.end(), values_.begin(), [&](const plist::Key& key) { return source.get(key); });
   }
 
   // Absent when the payload doesn't hold it.
