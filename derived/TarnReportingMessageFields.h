@@ -39,11 +39,9 @@ class TarnReportingMessageFields {
 
   // Takes over every value that the later payload holds.
   void merge(const TarnReportingMessageFields& later) noexcept {
-    for (std::size_t i = 0; i < kCount; ++i) {
-      if (later.values_[i].present()) {
-        values_[i] = later.values_[i];
-      }
-    }
+    std::transform(
+        later.values_.begin(), later.values_.end(), values_.begin(), values_.begin(),
+        [](const plist::ValueView& theirs, const plist::ValueView& own) { return theirs.present() ? theirs : own; });
   }
 
  private:
