@@ -30,9 +30,7 @@ class TarnReportingMessageFields {
   // `source`: a payload, or whatever else has values under keys.
   template <class Source>
   TarnReportingMessageFields(const Keys& keys, const Source& source) noexcept {
-    for (std::size_t i = 0; i < kCount; ++i) {
-      values_[i] = source.get(keys[i]);
-    }
+    std::transform(keys.begin(), keys.end(), values_.begin(), [&](const plist::Key& key) { return source.get(key); });
   }
 
   // Absent when the payload doesn't hold it.
@@ -41,11 +39,9 @@ class TarnReportingMessageFields {
 
   // Takes over every value that the later payload holds.
   void merge(const TarnReportingMessageFields& later) noexcept {
-    for (std::size_t i = 0; i < kCount; ++i) {
-      if (later.values_[i].present()) {
-        values_[i] = later.values_[i];
-      }
-    }
+    std::transform(
+        later.values_.begin(), later.values_.end(), values_.begin(), values_.begin(),
+        [](const plist::ValueView& theirs, const plist::ValueView& own) { return theirs.present() ? theirs : own; });
   }
 
  private:

@@ -149,21 +149,18 @@ bool TarnReportingSessionSummaryJsonFileWorker::openFile(const TarnReportingSess
   }
   log(LogLevel::Info, "SummaryJsonFileWorker opened file. action=open file=%@", path);
   reportPath_ = std::move(path);
-  writeFailed_ = false;
   setStarted(true);
   return writeLine("[");
 }
 
 bool TarnReportingSessionSummaryJsonFileWorker::writeLine(std::string line) {
-  if (writeFailed_) {
-    return false;  // after a gap the rest would be worth nothing
-  }
   line += '\n';
-  if (const auto error = reportFileHandle_->write(line)) {
+  const platform::MaybeError error = reportFileHandle_->write(line);
+  if (error) {
     log(LogLevel::Error, "SummaryJsonFileWorker failed to write line. action=writeline file=%@ error=\"%@\"",
         reportPath_, error->text);
-    writeFailed_ = true;
   }
+  writeFailed_ = error.has_value();
   return !writeFailed_;
 }
 
@@ -171,7 +168,9 @@ void TarnReportingSessionSummaryJsonFileWorker::closeFile() {
   if (!reportFileHandle_) {
     return;
   }
-  writeLine("]");
+  if (!writeFailed_) {  // after a gap the rest would be worth nothing
+    writeLine("]");
+  }
   if (const auto error = reportFileHandle_->close()) {
     log(LogLevel::Error, "SummaryJsonFileWorker failed to closed file. action=close file=%@ error=\"%@\"", reportPath_,
         error->text);

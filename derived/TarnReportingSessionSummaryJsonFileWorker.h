@@ -31,13 +31,13 @@ class TarnReportingSessionSummaryJsonFileWorker : public TarnReportingSessionWor
  private:
   bool openFile(const TarnReportingSession& session);
   void writeMessages(const TarnReportingSession& session);
-  // The line, or the lines of one message, by one write. False once a write failed.
+  // The line, or the lines of one message, by one write. Whether it could be written.
   bool writeLine(std::string line);
   void closeFile();
 
   std::string reportPath_;                                    // empty when no file is open
   std::unique_ptr<platform::WritableFile> reportFileHandle_;  // null when no file is open
-  bool writeFailed_ = false;                                  // for the file that is open
+  bool writeFailed_ = false;                                  // the latest write to the file that is open
 };
 
 }  // namespace tarn

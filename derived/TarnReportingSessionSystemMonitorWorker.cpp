@@ -45,8 +45,7 @@ TarnReportingSessionSystemMonitorWorker::~TarnReportingSessionSystemMonitorWorke
 }
 
 bool TarnReportingSessionSystemMonitorWorker::start() {
-  const std::shared_ptr<TarnReportingSession> owner = session();
-  if (!owner || !systemMonitorDictionary_) {
+  if (!systemMonitorDictionary_) {
     return true;
   }
   for (const plist::Key& feature : featureKeys_) {
@@ -87,10 +86,9 @@ void TarnReportingSessionSystemMonitorWorker::stop() {
     return;
   }
   const std::lock_guard guard(*systemMonitorDictionary_);
-  for (const auto observer : observers_) {
+  for (const auto observer : std::exchange(observers_, {})) {
     systemMonitorDictionary_->removeObserver(observer);
   }
-  observers_.clear();
 }
 
 }  // namespace tarn

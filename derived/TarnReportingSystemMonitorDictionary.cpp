@@ -5,6 +5,14 @@
 
 namespace tarn {
 
+void TarnReportingSystemMonitorDictionary::lock() const {
+  mutex_.lock();
+}
+
+void TarnReportingSystemMonitorDictionary::unlock() const {
+  mutex_.unlock();
+}
+
 plist::Dictionary TarnReportingSystemMonitorDictionary::state(const plist::Key& feature) const {
   const std::lock_guard guard(mutex_);
   const plist::ValueView state = states_.get(feature);

@@ -30,8 +30,8 @@ class TarnReportingSystemMonitorDictionary {
   TarnReportingSystemMonitorDictionary(const TarnReportingSystemMonitorDictionary&) = delete;
   TarnReportingSystemMonitorDictionary& operator=(const TarnReportingSystemMonitorDictionary&) = delete;
 
-  void lock() const { mutex_.lock(); }
-  void unlock() const { mutex_.unlock(); }
+  void lock() const;
+  void unlock() const;
 
   // The last state of a feature: its value under its own name, "tarnreporting_timestamp" and "systemuptime_sec". Empty
   // when it isn't known.

@@ -22,6 +22,18 @@ void expectSame(const Fields& read, const Fields& looked, const std::string& whe
   }
 }
 
+TEST(MessageFields, MergeTakesOverWhatTheLaterPayloadHoldsAndKeepsTheRest) {
+  const plist::Dictionary earlier{{"first", 1}, {"second", 2}, {"third", 3}};
+  for (const char* key : {"first", "second", "third"}) {
+    const plist::Dictionary later{{key, "new"}};
+    Fields fields(kKeys, earlier);
+    fields.merge(Fields(kKeys, later));
+    plist::Dictionary expected = earlier;
+    expected.set(plist::Key(key), "new");
+    expectSame(fields, Fields(kKeys, expected), key);
+  }
+}
+
 TEST(MessageFieldReader, FindsFieldsInAnyOrderAmongOtherKeys) {
   TarnReportingMessageFieldReader<Field> reader(kKeys);
   const plist::Dictionary payload{{"x", 1}, {"third", 3}, {"y", "two"}, {"first", "one"}, {"z", plist::Array{1}}};

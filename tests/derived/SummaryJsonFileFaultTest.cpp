@@ -126,6 +126,12 @@ TEST_F(SummaryJsonFileFault, WriteThatFailsAtAnyPointIsLoggedOnceAndWhatWasWritt
   }
 }
 
+TEST_F(SummaryJsonFileFault, MessagesAfterAFailedWriteAreNotLookedAt) {
+  platform_.fileSystem.failNext(Operation::Write, {5, "Input/output error"}, 1);
+  play(*makeTestSession());
+  EXPECT_EQ(ownLines(platform::LogLevel::Error).size(), 1U);  // nothing about the misfit
+}
+
 TEST_F(SummaryJsonFileFault, NextPeriodAfterAFailedWriteHasAWholeFile) {
   platform_.fileSystem.failNext(Operation::Write, {5, "Input/output error"}, 2);
   const auto session = makeTestSession();

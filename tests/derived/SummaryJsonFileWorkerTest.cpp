@@ -89,6 +89,19 @@ TEST_F(SummaryJsonFileWorker, SessionOfRedundantMessagesAloneCreatesNoFileAndClo
   EXPECT_FALSE(platform_.log.contains("SummaryJsonFileWorker closed"));
 }
 
+TEST_F(SummaryJsonFileWorker, StopWithNothingToWriteLeavesTheFileBeforeAlone) {
+  const auto session = makeTestSession();
+  session->sendMessage(message({{"n", 1}}));
+  const auto worker = TarnReportingSessionSummaryJsonFileWorker::initWithSession(session);
+  worker->stop();
+  const std::string before = onlyFile();
+  platform_.log.clear();
+  session->messages().front()->setIsRedundant(true);
+  worker->stop();
+  EXPECT_EQ(onlyFile(), before);
+  EXPECT_TRUE(platform_.log.entries().empty());
+}
+
 TEST_F(SummaryJsonFileWorker, EmptyLogCreatesNoFile) {
   const auto session = makeTestSession();
   TarnReportingSessionSummaryJsonFileWorker::initWithSession(session)->stop();

@@ -199,6 +199,30 @@ TEST_F(SystemMonitorWorker, SessionDroppedWithoutAStopLeavesNoObserverBehind) {
   EXPECT_TRUE(script().received.empty());
 }
 
+TEST_F(SystemMonitorWorker, WorkerDroppedBeforeItsSessionTakesItsObserversAlong) {
+  useWorkers<ConsumerWorker>();
+  startMonitor();
+  const auto session = makeSession();
+  session->start();
+  auto worker = TarnReportingSessionSystemMonitorWorker::initWithSession(session);
+  EXPECT_TRUE(worker->start());
+  notify(kRingerChanged, 1);
+  EXPECT_EQ(received().size(), 1U);
+  worker.reset();
+  notify(kRingerChanged, 0);
+  EXPECT_EQ(received().size(), 1U);
+}
+
+TEST_F(SystemMonitorWorker, WithoutADictionaryThereIsNothingToObserve) {
+  useWorkers<ConsumerWorker>();
+  const auto session = makeSession();
+  session->start();
+  TarnReportingSessionSystemMonitorWorker worker(session, nullptr, {kRinger});
+  EXPECT_TRUE(worker.start());
+  worker.stop();
+  EXPECT_TRUE(script().received.empty());
+}
+
 TEST_F(SystemMonitorWorker, ObserversDoNotKeepTheDictionaryAlive) {
   startMonitor();
   const std::weak_ptr<TarnReportingSystemMonitorDictionary> dictionary =

@@ -104,6 +104,29 @@ TEST(TarnReportingSystemMonitorDictionary, ObserversRunWithoutTheLock) {
   EXPECT_TRUE(otherThreadGotIn);
 }
 
+TEST(TarnReportingSystemMonitorDictionary, LockKeepsOtherThreadsOutUntilItIsReleased) {
+  constexpr int kLooks = 10000;
+  Dictionary dictionary;
+  std::atomic<bool> started{false};
+  std::atomic<bool> otherThreadGotIn{false};
+  std::unique_lock guard(dictionary);
+  std::thread other([&] {
+    started = true;
+    dictionary.store("ringerstate", {{"ringerstate", true}});
+    otherThreadGotIn = true;
+  });
+  while (!started) {
+    std::this_thread::yield();
+  }
+  for (int look = 0; look < kLooks && !otherThreadGotIn; ++look) {
+    std::this_thread::yield();
+  }
+  EXPECT_FALSE(otherThreadGotIn);
+  guard.unlock();
+  other.join();
+  EXPECT_TRUE(otherThreadGotIn);
+}
+
 TEST(TarnReportingSystemMonitorDictionary, LockMayBeTakenAgainByItsHolder) {
   Dictionary dictionary;
   const std::lock_guard guard(dictionary);
