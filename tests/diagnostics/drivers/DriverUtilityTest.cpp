@@ -370,6 +370,18 @@ TEST_F(DriverUtility, TellsOfASamplingBeforeItAndOfTheLatestSamplesAroundIt) {
             (Lines{"log getting latest samples", "flume samples", "log done getting latest samples", "flume delta"}));
 }
 
+TEST_F(DriverUtility, ASamplingThatFailsIsDoneBeforeItsErrorIsTold) {
+  flume_.setChannel(simpleChannel(hapticsName("a"), 1));
+  Utility utility(flume_);
+  utility.init();
+  const auto session = makeSession();
+  flume_.fail(Step::CreateSamples, -9);
+  platform_.order.start();
+  utility.sendDriverLogsForSession(*session, {});
+  EXPECT_EQ(platform_.order.entries(), (Lines{"log getting latest samples", "flume samples",
+                                              "log done getting latest samples", "log FlumeCreateSamples error -9"}));
+}
+
 TEST_F(DriverUtility, BoundsThatFailWithAnyCodeAreLoggedAndHitsBelowZeroAreHits) {
   EXPECT_EQ(histogram(histogramChannel({{}, {}, {}, "x"}, {{0, 1, -2}, {1, 2, 0, 5}}))["Histogram_x"].text(),
             "count=2,lower=0,upper=2,min=3,max=17,unit=us::0-1:-2");

@@ -305,6 +305,7 @@ TEST_F(SnareTrigger, TheLastMessageIsACopyThatNoChangeOfTheRecordReaches) {
   worker_.handleMessage(record);
   EXPECT_NE(state().lastMessage, record);
   record->mutableMessage().set("isSessionStarted", "YES");
+  ASSERT_TRUE(state().lastMessage != nullptr);
   EXPECT_EQ(state().lastMessage->message(), (plist::Dictionary{{"n", 1}}));
   handle(1);
   EXPECT_EQ(state().interestedCount, 1U);
@@ -315,6 +316,7 @@ TEST_F(SnareTrigger, TheCopySharesThePayload) {
   useProbes<FiringProbe>();
   const Message record = message({{"n", 1}});
   worker_.handleMessage(record);
+  ASSERT_TRUE(state().lastMessage != nullptr);
   EXPECT_TRUE(state().lastMessage->message().sharesStorageWith(record->message()));
 }
 
