@@ -4,7 +4,7 @@ include_guard(GLOBAL)
 option(TARN_TESTS "Build the tests" ON)
 option(TARN_BENCH "Build the benchmarks" OFF)
 option(TARN_FUZZ "Build the fuzzers (clang only)" OFF)
-option(TARN_COVERAGE "Instrument for line coverage" OFF)
+option(TARN_COVERAGE "Instrument for line and branch coverage (clang only)" OFF)
 set(TARN_SANITIZE "" CACHE STRING "Sanitizers to build with, as -fsanitize= takes them")
 
 set(CMAKE_CXX_STANDARD 20)
@@ -42,8 +42,9 @@ if(TARN_FUZZ)
   target_compile_options(tarn_options INTERFACE -fsanitize=fuzzer-no-link)
 endif()
 if(TARN_COVERAGE)
-  target_compile_options(tarn_options INTERFACE --coverage -fprofile-update=atomic)
-  target_link_options(tarn_options INTERFACE --coverage)
+  # By the source, not by the compiled code: no branch is counted for what an exception might do.
+  target_compile_options(tarn_options INTERFACE -fprofile-instr-generate -fcoverage-mapping -fprofile-update=atomic)
+  target_link_options(tarn_options INTERFACE -fprofile-instr-generate)
 endif()
 
 # tarn_library(NAME SOURCES file... [DEPENDS target...]): one floor or folder as a static library.

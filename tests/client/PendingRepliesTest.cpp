@@ -65,6 +65,19 @@ TEST(PendingReplies, AHeldStartOutlivesOtherRequests) {
   EXPECT_TRUE(line.cancelled().empty());
 }
 
+TEST(PendingReplies, AForgottenStartIsNeitherAnsweredNorCancelled) {
+  Line line;
+  line.add(createReportingSession(5));
+  const auto start = line.add(startReportingSessionForID(5));
+  EXPECT_TRUE(line.take(1));
+  EXPECT_EQ(line.pending().heldCount(), 1U);
+  line.pending().forget(start);
+  EXPECT_EQ(line.pending().size(), 0U);
+  EXPECT_FALSE(line.take(start));
+  EXPECT_TRUE(line.take(line.add(destroyReportingSession(5))));
+  EXPECT_TRUE(line.cancelled().empty());
+}
+
 TEST(PendingReplies, ASecondStartOfARunningSessionIsCancelledAtOnce) {
   Line line;
   line.add(createReportingSession(5));

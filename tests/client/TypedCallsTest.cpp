@@ -109,5 +109,23 @@ TEST(TypedCalls, ResultsOfAnotherKindReadAsNothing) {
   EXPECT_TRUE(reply.numbers().empty());
 }
 
+TEST(TypedCalls, EveryOutcomeHasAName) {
+  const std::vector<std::string_view> names{"ok",        "error", "cancelled", "connection lost",
+                                            "timed out", "full",  "too large"};
+  for (std::size_t at = 0; at < names.size(); ++at) {
+    EXPECT_EQ(outcomeName(static_cast<Outcome>(at)), names[at]);
+  }
+  EXPECT_EQ(static_cast<std::size_t>(Outcome::TooLarge), names.size() - 1);
+}
+
+TEST(TypedCalls, ResultsReadAsWhatTheyAre) {
+  Reply reply;
+  reply.results.emplace_back(plist::Array{1, -2});
+  EXPECT_EQ(reply.numbers(), (std::vector<std::int64_t>{1, -2}));
+  EXPECT_EQ(reply.number(), 0);
+  reply.results.front() = plist::Value(-7);
+  EXPECT_EQ(reply.number(), -7);
+}
+
 }  // namespace
 }  // namespace tarn::client

@@ -265,6 +265,13 @@ TEST_P(SummaryJsonFileMisfit, LeavesItsMessageOutAndTheFileStaysValid) {
   EXPECT_EQ(bad->message()["isSessionStarted"].text(), "YES");
 }
 
+// An array of just this item; of an array in braces clang makes a copy.
+plist::Array inArray(const plist::ValueView& item) {
+  plist::Array array;
+  array.append(item);
+  return array;
+}
+
 INSTANTIATE_TEST_SUITE_P(
     Values, SummaryJsonFileMisfit,
     ::testing::Values(Misfit{"Date", plist::Date{1700000000}, R"(JSON can't hold a date at ["bad"])"},
@@ -274,7 +281,7 @@ INSTANTIATE_TEST_SUITE_P(
                       Misfit{"InfiniteFloat", -HUGE_VALF, R"(JSON can't hold a number that is not finite at ["bad"])"},
                       Misfit{"NestedDate", plist::Dictionary{{"list", plist::Array{1, plist::Date{0}}}},
                              R"(JSON can't hold a date at ["bad"]["list"][1])"},
-                      Misfit{"NestedData", plist::Array{plist::Array{plist::DataView{""}}},
+                      Misfit{"NestedData", inArray(plist::Array{plist::DataView{""}}),
                              R"(JSON can't hold data at ["bad"][0][0])"},
                       Misfit{"NestedInfinite", plist::Array{plist::Dictionary{{"x", HUGE_VAL}}},
                              R"(JSON can't hold a number that is not finite at ["bad"][0]["x"])"}),

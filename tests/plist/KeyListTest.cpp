@@ -120,5 +120,35 @@ TEST(KeyListStress, ThreadsMakeAndDropTheSameListsAtOnce) {
   EXPECT_EQ(KeyList::aliveCount(), before);
 }
 
+TEST(KeyList, AnEmptyListHoldsNothing) {
+  const auto list = KeyList::make(std::span<const Key>{});
+  ASSERT_TRUE(list.has_value());
+  EXPECT_EQ(list->size(), 0U);
+  EXPECT_EQ(list->indexOf(Key("a")), KeyList::npos);
+  EXPECT_EQ(list->indexOf("a"), KeyList::npos);
+  EXPECT_FALSE(list->hasBlanks());
+  EXPECT_EQ(*list, KeyList());
+}
+
+TEST(KeyList, AListTellsWhetherAnyKeyHasABlank) {
+  const std::vector<Key> keys{Key("a"), Key("b c")};
+  EXPECT_TRUE(KeyList::make(keys)->hasBlanks());
+  EXPECT_FALSE(KeyList::make(std::span(keys).first(1))->hasBlanks());
+}
+
+TEST(KeyList, ALongListFindsItsKeysAndNoOthers) {
+  std::vector<Key> keys;
+  for (int i = 0; i < 100; ++i) keys.emplace_back("long list " + std::to_string(i));
+  const auto list = KeyList::make(keys);
+  ASSERT_TRUE(list.has_value());
+  for (std::size_t i = 0; i < keys.size(); ++i) {
+    EXPECT_EQ(list->indexOf(keys[i]), i);
+    EXPECT_EQ(list->indexOf(keys[i].text()), i);
+  }
+  EXPECT_EQ(list->indexOf("long list 100"), KeyList::npos);
+  keys.push_back(keys.front());
+  EXPECT_FALSE(KeyList::make(keys).has_value());
+}
+
 }  // namespace
 }  // namespace tarn::plist

@@ -110,5 +110,23 @@ TEST(ValueView, WhatIsNoNumberReadsZero) {
   EXPECT_FALSE(ValueView("no").asBool());
 }
 
+TEST(ValueView, EveryKindReadsAsANumberWithoutASign) {
+  EXPECT_EQ(ValueView(true).asUInt64(), 1U);
+  EXPECT_EQ(ValueView(-1).asUInt64(), 0U);
+  EXPECT_EQ(ValueView(UINT64_MAX).asUInt64(), UINT64_MAX);
+  EXPECT_EQ(ValueView(1e30).asUInt64(), UINT64_MAX);
+  EXPECT_EQ(ValueView("12").asUInt64(), 12U);
+  EXPECT_EQ(ValueView("-12").asUInt64(), 0U);
+  EXPECT_EQ(ValueView("9223372036854775806").asUInt64(), 9223372036854775806U);
+  EXPECT_EQ(ValueView("18446744073709551615").asUInt64(), UINT64_MAX);
+  EXPECT_EQ(ValueView(Array{1}).asUInt64(), 0U);
+}
+
+TEST(ValueView, WhatIsNoContainerReadsAsAnEmptyOne) {
+  EXPECT_TRUE(ValueView(Dictionary{{"a", 1}}).array().empty());
+  EXPECT_TRUE(ValueView(Array{1}).dictionary().empty());
+  EXPECT_TRUE(ValueView().array().empty());
+}
+
 }  // namespace
 }  // namespace tarn::plist

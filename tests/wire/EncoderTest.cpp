@@ -133,5 +133,11 @@ TEST(Encoder, NoReporterIDsAreNull) {
             "860106a00000f6");
 }
 
+TEST(Encoder, AnAbsentValueIsNull) {
+  std::string out;
+  appendValue(out, plist::ValueView());
+  EXPECT_EQ(toHex(out), "f6");
+}
+
 }  // namespace
 }  // namespace tarn::wire

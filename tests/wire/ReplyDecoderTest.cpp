@@ -71,6 +71,10 @@ TEST(ReplyDecoder, RefusesWhatIsNoReplyAndSaysWhy) {
        "02",
        "a result that is no property-list value"},
       {"8307f681f7", "a result that is no property-list value"},
+      {"8207", "an error that is neither null nor [domain, code, text]"},
+      {"8307f6a10102", "a result that is no property-list value"},
+      {"8307f6a1616181f6", "a result that is no property-list value"},
+      {"8307f6bf", "a result that is no property-list value"},
       {"8207f600", "bytes behind the array"}};
   for (const auto& [hex, reason] : frames) {
     const Outcome outcome = decode(hex);

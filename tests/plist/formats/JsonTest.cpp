@@ -64,5 +64,18 @@ TEST(Json, Base64IsDecodedStrictly) {
   }
 }
 
+TEST(Json, AbsentValuesAreNull) {
+  EXPECT_EQ(json(ValueView()), "null");
+}
+
+TEST(Json, BackspaceAndFormFeedHaveShortEscapes) {
+  EXPECT_EQ(json("\b\f"), R"("\b\f")");
+}
+
+TEST(Json, ADateJustBeforeASecondIsThatSecond) {
+  EXPECT_EQ(json(Date{1795168799.9999998}), R"("2026-11-20T10:00:00Z")");
+  EXPECT_EQ(json(Date{1795168799.999999}), R"("2026-11-20T09:59:59.999999Z")");
+}
+
 }  // namespace
 }  // namespace tarn::plist
