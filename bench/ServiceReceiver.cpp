@@ -29,19 +29,20 @@ ServiceReceiver::ServiceReceiver(const Settings& settings, const ServiceSetup& s
     fail(connected.error);
   }
   client_ = std::move(connected.client);
-  mustBeOk(client_->createReportingSession(kReporterID), "creating the session");
-  mustBeOk(client_->setServiceType(kGenericService, kReporterID), "setting the service type");
-  mustBeOk(client_->setConfiguration({{"HostApplicationDisplayID", "sys.oxbow.music"}}, kReporterID), "configuring");
+  mustBeOk(client_->call(client::createReportingSession(kReporterID)), "creating the session");
+  mustBeOk(client_->call(client::setServiceType(kGenericService, kReporterID)), "setting the service type");
+  mustBeOk(client_->call(client::setConfiguration({{"HostApplicationDisplayID", "sys.oxbow.music"}}, kReporterID)),
+           "configuring");
   start();
 }
 
 void ServiceReceiver::start() {
-  client_->startReportingSessionForID(kReporterID);
+  client_->send(client::startReportingSessionForID(kReporterID));
   client_->flush();
 }
 
 void ServiceReceiver::forget() {
-  mustBeOk(client_->stopReportingSessionForID(kReporterID), "stopping the session");
+  mustBeOk(client_->call(client::stopReportingSessionForID(kReporterID)), "stopping the session");
   start();
 }
 

@@ -76,7 +76,8 @@ class TarnReportingClient {
 
   void setLostHandler(LostHandler handler);
 
-  // Sends and waits for the reply, at most so long. Everything sent before is written first.
+  // Sends a request (one of Requests.h) and waits for the reply, at most so long. Everything sent before is written
+  // first.
   Reply call(const Request& request, std::optional<Milliseconds> timeout = std::nullopt);
   // Sends; where a bound is reached waits until the service has taken or answered enough. Not Sent: the handler is
   // never called.
@@ -105,21 +106,6 @@ class TarnReportingClient {
 
   // Ends the connection. What is still outgoing is not written: flush() first. Outstanding requests are Cancelled.
   void close();
-
-  // The remote operations, each waiting for its reply. (A start is sent: its reply comes with the stop.)
-  Reply createReportingSession(std::int64_t reporterID);
-  Reply setServiceType(std::uint16_t serviceType, std::int64_t reporterID);
-  Reply getServiceNameForReporterID(std::int64_t reporterID);
-  Reply setConfiguration(const plist::Dictionary& configuration, std::int64_t reporterID);
-  SendStatus startReportingSessionForID(std::int64_t reporterID, ReplyHandler handler = {});
-  Reply sendMessage(const plist::Dictionary& message, std::uint32_t category, std::uint16_t type,
-                    std::optional<std::vector<std::int64_t>> reporterIDs = std::nullopt);
-  Reply stopReportingSessionForID(std::int64_t reporterID);
-  Reply destroyReportingSession(std::int64_t reporterID);
-  Reply reporterID(std::int64_t reporterID);
-  Reply getAllReporters();
-  Reply killService();
-  Reply status();
 
  private:
   using Clock = std::chrono::steady_clock;

@@ -2,6 +2,7 @@
 
 #include <bit>
 #include <cmath>
+#include <concepts>
 
 #include "plist/Dictionary.h"
 #include "wire/CborReader.h"
@@ -95,16 +96,25 @@ void appendNumbers(std::string& out, std::span<const std::int64_t> numbers) {
   }
 }
 
-void appendMessage(std::string& out, const plist::Dictionary& message, std::uint32_t category, std::uint16_t type) {
-  appendDictionary(out, message);
-  appendHead(out, Major::Unsigned, category);
-  appendHead(out, Major::Unsigned, type);
+void appendArgument(std::string& out, std::int64_t number) {
+  appendSigned(out, number);
 }
 
-void appendRequestHead(std::string& out, std::uint64_t id, Operation operation) {
-  appendHead(out, Major::Array, 2 + argumentCount(operation));
-  appendHead(out, Major::Unsigned, id);
-  appendHead(out, Major::Unsigned, static_cast<std::uint64_t>(operation));
+template <std::unsigned_integral Number>
+void appendArgument(std::string& out, Number number) {
+  appendHead(out, Major::Unsigned, number);
+}
+
+void appendArgument(std::string& out, const plist::Dictionary& dictionary) {
+  appendDictionary(out, dictionary);
+}
+
+void appendArgument(std::string& out, const ReporterIDs& reporterIDs) {
+  if (reporterIDs) {
+    appendNumbers(out, *reporterIDs);
+  } else {
+    out.push_back(kNull);
+  }
 }
 
 }  // namespace
@@ -161,32 +171,13 @@ void Encoder::endFrame(std::size_t header) {
 }
 
 void Encoder::request(std::uint64_t id, const Request& request) {
+  const ArgumentList& arguments = rowOf(request.operation).arguments;
   const std::size_t header = beginFrame();
-  appendRequestHead(out_, id, request.operation);
-  switch (request.operation) {
-    case Operation::SetServiceType:
-      appendHead(out_, Major::Unsigned, request.serviceType);
-      appendSigned(out_, request.reporterID);
-      break;
-    case Operation::SetConfiguration:
-      appendDictionary(out_, request.dictionary);
-      appendSigned(out_, request.reporterID);
-      break;
-    case Operation::SendMessage:
-      appendMessage(out_, request.dictionary, request.category, request.type);
-      if (request.reporterIDs) {
-        appendNumbers(out_, *request.reporterIDs);
-      } else {
-        out_.push_back(kNull);
-      }
-      break;
-    case Operation::GetAllReporters:
-    case Operation::KillService:
-    case Operation::Status:
-      break;
-    default:
-      appendSigned(out_, request.reporterID);
-      break;
+  appendHead(out_, Major::Array, 2 + arguments.size());
+  appendHead(out_, Major::Unsigned, id);
+  appendHead(out_, Major::Unsigned, numberOf(request.operation));
+  for (const Argument argument : arguments) {
+    std::visit([&](auto member) { appendArgument(out_, request.*member); }, rowOf(argument).member);
   }
   endFrame(header);
 }

@@ -31,12 +31,12 @@ class RequestPass {
   bool readOperation();
   bool readArguments();
   bool readEnd();
-  bool readReporterID();
-  bool readDictionary();
-  bool readReporterIDs();
+  // Each fails with `expected` where something of another kind stands.
+  bool read(std::int64_t& number, const char* expected);
   template <class Number>
-  bool readNumber(Number& number, const char* trouble);
-  bool readSigned(std::int64_t& number, const char* trouble);
+  bool read(Number& number, const char* expected);
+  bool read(plist::Dictionary& dictionary, const char* expected);
+  bool read(ReporterIDs& reporterIDs, const char* expected);
   bool countOpenItems();
 
   bool fail(ErrorCode code, const char* trouble) noexcept {
@@ -75,7 +75,7 @@ bool RequestPass::readFrameHead() {
 // An open-ended array tells its length only at its break: a walk of its own counts, before the arguments are looked at.
 // It ends early where there are more than any operation takes.
 bool RequestPass::countOpenItems() {
-  constexpr std::uint64_t kTooMany = 8;
+  constexpr std::uint64_t kTooMany = 2 + kMaxArguments + 1;
   CborReader ahead = in_;
   while (!ahead.atBreak() && items_ < kTooMany) {
     if (ahead.atEnd() || skipItem(ahead) != nullptr) return false;
@@ -110,25 +110,15 @@ bool RequestPass::readOperation() {
   }
   request_.operation = *operation;
   hasOperation_ = true;
-  return items_ - 2 == argumentCount(*operation) || badArgument("wrong number of arguments");
+  return items_ - 2 == rowOf(*operation).arguments.size() || badArgument("wrong number of arguments");
 }
 
 bool RequestPass::readArguments() {
-  switch (request_.operation) {
-    case Operation::SetServiceType:
-      return readNumber(request_.serviceType, "type: 0 to 65535 expected") && readReporterID();
-    case Operation::SetConfiguration:
-      return readDictionary() && readReporterID();
-    case Operation::SendMessage:
-      return readDictionary() && readNumber(request_.category, "category: 0 to 4294967295 expected") &&
-             readNumber(request_.type, "type: 0 to 65535 expected") && readReporterIDs();
-    case Operation::GetAllReporters:
-    case Operation::KillService:
-    case Operation::Status:
-      return true;
-    default:
-      return readReporterID();
+  for (const Argument argument : rowOf(request_.operation).arguments) {
+    const ArgumentRow& row = rowOf(argument);
+    if (!std::visit([&](auto member) { return read(request_.*member, row.expected); }, row.member)) return false;
   }
+  return true;
 }
 
 bool RequestPass::readEnd() {
@@ -139,14 +129,14 @@ bool RequestPass::readEnd() {
   return in_.atEnd();
 }
 
-bool RequestPass::readSigned(std::int64_t& number, const char* trouble) {
+bool RequestPass::read(std::int64_t& number, const char* expected) {
   CborHead head;
   if (!in_.readHead(head)) {
     return false;
   }
   const bool integer = head.major == Major::Unsigned || head.major == Major::Negative;
   if (!integer || head.argument > static_cast<std::uint64_t>(std::numeric_limits<std::int64_t>::max())) {
-    return badArgument(trouble);
+    return badArgument(expected);
   }
   const auto magnitude = static_cast<std::int64_t>(head.argument);
   number = head.major == Major::Unsigned ? magnitude : -1 - magnitude;
@@ -154,29 +144,25 @@ bool RequestPass::readSigned(std::int64_t& number, const char* trouble) {
 }
 
 template <class Number>
-bool RequestPass::readNumber(Number& number, const char* trouble) {
+bool RequestPass::read(Number& number, const char* expected) {
   CborHead head;
   if (!in_.readHead(head)) {
     return false;
   }
   if (head.major != Major::Unsigned || head.argument > std::numeric_limits<Number>::max()) {
-    return badArgument(trouble);
+    return badArgument(expected);
   }
   number = static_cast<Number>(head.argument);
   return true;
 }
 
-bool RequestPass::readReporterID() {
-  return readSigned(request_.reporterID, "reporter ID: a signed 64-bit integer expected");
-}
-
-bool RequestPass::readDictionary() {
+bool RequestPass::read(plist::Dictionary& dictionary, const char* expected) {
   CborHead head;
   if (!in_.readHead(head)) {
     return false;
   }
   if (head.major != Major::Map) {
-    return badArgument("a dictionary expected");
+    return badArgument(expected);
   }
   BuilderSink sink(builder_, keyLists_);
   PropertyListReader<BuilderSink> reader(in_, sink);
@@ -185,17 +171,16 @@ bool RequestPass::readDictionary() {
     builder_.reset();
     return fail(ErrorCode::NotPropertyList, reader.trouble());
   }
-  std::optional<plist::Dictionary> dictionary = builder_.finishDictionary(keyLists_);
-  if (!dictionary) {
+  std::optional<plist::Dictionary> finished = builder_.finishDictionary(keyLists_);
+  if (!finished) {
     builder_.reset();
     return fail(ErrorCode::NotPropertyList, "a key given twice");
   }
-  request_.dictionary = std::move(*dictionary);
+  dictionary = std::move(*finished);
   return true;
 }
 
-bool RequestPass::readReporterIDs() {
-  constexpr const char* kTrouble = "reporter IDs: an array of signed 64-bit integers or null expected";
+bool RequestPass::read(ReporterIDs& reporterIDs, const char* expected) {
   CborHead head;
   if (!in_.readHead(head)) {
     return false;
@@ -204,13 +189,13 @@ bool RequestPass::readReporterIDs() {
     return true;
   }
   if (head.major != Major::Array || (!head.open() && head.argument > in_.left())) {
-    return badArgument(kTrouble);
+    return badArgument(expected);
   }
-  std::vector<std::int64_t>& ids = request_.reporterIDs.emplace();
+  std::vector<std::int64_t>& ids = reporterIDs.emplace();
   ids.reserve(static_cast<std::size_t>(head.argument));
   while (head.open() ? !in_.atBreak() : ids.size() < head.argument) {
     std::int64_t id = 0;
-    if (!readSigned(id, kTrouble)) return false;
+    if (!read(id, expected)) return false;
     ids.push_back(id);
   }
   in_.skip(head.open() ? 1 : 0);

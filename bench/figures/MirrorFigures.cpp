@@ -173,14 +173,14 @@ std::vector<double> measureLiveSessions(const Settings& settings) {
     for (std::size_t i = 0; i < count; ++i) {
       const std::int64_t id = from + static_cast<std::int64_t>(i);
       const std::vector<std::int64_t> ids{id};
-      const bool sent = client.createReportingSession(id).ok() &&
-                        client.startReportingSessionForID(id) == client::SendStatus::Sent &&
-                        client.sendMessage(makeMessage(1), 4, 1, ids).ok();
+      const bool sent = client.call(client::createReportingSession(id)).ok() &&
+                        client.send(client::startReportingSessionForID(id)) == client::SendStatus::Sent &&
+                        client.call(client::sendMessage(makeMessage(1), 4, 1, ids)).ok();
       if (!sent) {
         fail("the service refuses a session");
       }
     }
-    while (client.status().dictionary().get("queued").asInt64() != 0) {
+    while (client.call(client::status()).dictionary().get("queued").asInt64() != 0) {
       std::this_thread::yield();
     }
   };

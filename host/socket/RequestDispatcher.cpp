@@ -1,12 +1,17 @@
 #include "host/socket/RequestDispatcher.h"
 
+#include <algorithm>
+#include <array>
+#include <type_traits>
 #include <utility>
 
 namespace tarn::linux_host {
 
 namespace {
 
+using platform::TarnReportingServiceProtocol;
 using wire::Operation;
+using wire::Result;
 
 // One request's right to one reply.
 class ReplyTicket {
@@ -35,71 +40,100 @@ class ReplyTicket {
   bool answered_ = false;
 };
 
-platform::Acknowledge acknowledge(ReplyTicket ticket) {
-  return [ticket = std::move(ticket)](const std::optional<platform::RemoteError>& error, bool done) mutable {
-    ticket.answer(error, [done](ReplySink& sink, std::uint64_t id) { sink.sendReply(id, {done}); });
-  };
+// How the remote interface hands over each kind of result, and how that goes out.
+template <Result kResult>
+struct ReplyOf {  // Nothing
+  using Type = platform::Reply<>;
+  static void send(ReplySink& sink, std::uint64_t id) { sink.sendReply(id, {}); }
+};
+
+template <>
+struct ReplyOf<Result::True> {
+  using Type = platform::Acknowledge;
+  static void send(ReplySink& sink, std::uint64_t id, bool done) { sink.sendReply(id, {done}); }
+};
+
+template <>
+struct ReplyOf<Result::TrueAtStop> : ReplyOf<Result::True> {};
+
+template <>
+struct ReplyOf<Result::Number> {
+  using Type = platform::Reply<std::uint16_t>;
+  static void send(ReplySink& sink, std::uint64_t id, unsigned number) { sink.sendReply(id, {number}); }
+};
+
+template <>
+struct ReplyOf<Result::Dictionary> {
+  using Type = platform::Reply<plist::Dictionary>;
+  static void send(ReplySink& sink, std::uint64_t id, const plist::Dictionary& dictionary) {
+    sink.sendReply(id, {dictionary});
+  }
+};
+
+template <>
+struct ReplyOf<Result::Numbers> {
+  using Type = platform::Reply<std::vector<std::int64_t>>;
+  static void send(ReplySink& sink, std::uint64_t id, const std::vector<std::int64_t>& numbers) {
+    sink.sendNumbers(id, numbers);
+  }
+};
+
+template <Result kResult>
+typename ReplyOf<kResult>::Type replyWith(ReplyTicket ticket) {
+  return
+      [ticket = std::move(ticket)](const std::optional<platform::RemoteError>& error, const auto&... results) mutable {
+        ticket.answer(error, [&](ReplySink& sink, std::uint64_t id) { ReplyOf<kResult>::send(sink, id, results...); });
+      };
 }
 
-platform::Reply<> bare(ReplyTicket ticket) {
-  return [ticket = std::move(ticket)](const std::optional<platform::RemoteError>& error) mutable {
-    ticket.answer(error, [](ReplySink& sink, std::uint64_t id) { sink.sendReply(id, {}); });
-  };
+// Calls the remote interface's operation with the arguments, and for the result, that the table names.
+template <Operation kOperation, auto kMethod>
+void call(wire::Request& request, TarnReportingServiceProtocol& service, ReplyTicket ticket) {
+  static constexpr wire::OperationRow kRow = wire::rowOf(kOperation);
+  [&]<std::size_t... kIndex>(std::index_sequence<kIndex...>) {
+    if constexpr (kRow.result == Result::NoReply) {
+      (service.*kMethod)(std::move(wire::argumentIn<kRow.arguments[kIndex]>(request))...);
+    } else {
+      (service.*kMethod)(std::move(wire::argumentIn<kRow.arguments[kIndex]>(request))...,
+                         replyWith<kRow.result>(std::move(ticket)));
+    }
+  }
+  (std::make_index_sequence<kRow.arguments.size()>());
 }
 
-platform::Reply<std::uint16_t> serviceType(ReplyTicket ticket) {
-  return [ticket = std::move(ticket)](const std::optional<platform::RemoteError>& error, std::uint16_t type) mutable {
-    ticket.answer(error,
-                  [type](ReplySink& sink, std::uint64_t id) { sink.sendReply(id, {static_cast<unsigned>(type)}); });
-  };
-}
+struct Entry {
+  Operation operation;
+  void (*call)(wire::Request& request, TarnReportingServiceProtocol& service, ReplyTicket ticket);
+};
 
-platform::Reply<plist::Dictionary> dictionary(ReplyTicket ticket) {
-  return [ticket = std::move(ticket)](const std::optional<platform::RemoteError>& error,
-                                      const plist::Dictionary& result) mutable {
-    ticket.answer(error, [&result](ReplySink& sink, std::uint64_t id) { sink.sendReply(id, {result}); });
-  };
-}
+template <Operation kOperation, auto kMethod>
+constexpr Entry kEntry{kOperation, &call<kOperation, kMethod>};
 
-platform::Reply<std::vector<std::int64_t>> numbers(ReplyTicket ticket) {
-  return [ticket = std::move(ticket)](const std::optional<platform::RemoteError>& error,
-                                      const std::vector<std::int64_t>& result) mutable {
-    ticket.answer(error, [&result](ReplySink& sink, std::uint64_t id) { sink.sendNumbers(id, result); });
-  };
-}
+constexpr std::array kEntries = {
+    kEntry<Operation::CreateReportingSession, &TarnReportingServiceProtocol::createReportingSession>,
+    kEntry<Operation::SetServiceType, &TarnReportingServiceProtocol::setServiceType>,
+    kEntry<Operation::GetServiceNameForReporterID, &TarnReportingServiceProtocol::getServiceNameForReporterID>,
+    kEntry<Operation::SetConfiguration, &TarnReportingServiceProtocol::setConfiguration>,
+    kEntry<Operation::StartReportingSessionForID, &TarnReportingServiceProtocol::startReportingSessionForID>,
+    kEntry<Operation::SendMessage, &TarnReportingServiceProtocol::sendMessage>,
+    kEntry<Operation::StopReportingSessionForID, &TarnReportingServiceProtocol::stopReportingSessionForID>,
+    kEntry<Operation::DestroyReportingSession, &TarnReportingServiceProtocol::destroyReportingSession>,
+    kEntry<Operation::ReporterID, &TarnReportingServiceProtocol::reporterID>,
+    kEntry<Operation::GetAllReporters, &TarnReportingServiceProtocol::getAllReporters>,
+    kEntry<Operation::KillService, &TarnReportingServiceProtocol::killService>,
+};
+static_assert(std::equal(kEntries.begin(), kEntries.end(), wire::kOperations.begin(),
+                         wire::kOperations.begin() + wire::kServiceOperations,
+                         [](const Entry& entry, const auto& row) { return entry.operation == row.operation; }),
+              "one entry for each operation of the service, in the table's order");
 
 }  // namespace
 
 void dispatchRequest(wire::DecodedRequest& request, platform::TarnReportingServiceProtocol& service,
                      std::weak_ptr<ReplySink> sink) {
-  ReplyTicket ticket(std::move(sink), request.id);
-  const std::int64_t reporterID = request.reporterID;
-  switch (request.operation) {
-    case Operation::CreateReportingSession:
-      return service.createReportingSession(reporterID, acknowledge(std::move(ticket)));
-    case Operation::SetServiceType:
-      return service.setServiceType(request.serviceType, reporterID, acknowledge(std::move(ticket)));
-    case Operation::GetServiceNameForReporterID:
-      return service.getServiceNameForReporterID(reporterID, serviceType(std::move(ticket)));
-    case Operation::SetConfiguration:
-      return service.setConfiguration(std::move(request.dictionary), reporterID, acknowledge(std::move(ticket)));
-    case Operation::StartReportingSessionForID:
-      return service.startReportingSessionForID(reporterID, acknowledge(std::move(ticket)));
-    case Operation::SendMessage:
-      return service.sendMessage(std::move(request.dictionary), request.category, request.type,
-                                 std::move(request.reporterIDs), bare(std::move(ticket)));
-    case Operation::StopReportingSessionForID:
-      return service.stopReportingSessionForID(reporterID, acknowledge(std::move(ticket)));
-    case Operation::DestroyReportingSession:
-      return service.destroyReportingSession(reporterID, acknowledge(std::move(ticket)));
-    case Operation::ReporterID:
-      return service.reporterID(reporterID, dictionary(std::move(ticket)));
-    case Operation::GetAllReporters:
-      return service.getAllReporters(numbers(std::move(ticket)));
-    case Operation::KillService:
-      return service.killService();
-    case Operation::Status:
-      return;  // the host's own, answered before it comes here
+  if (wire::rowOf(request.operation).servedBy == wire::ServedBy::Service) {
+    const Entry& entry = kEntries[wire::operationIndex(wire::numberOf(request.operation))];
+    entry.call(request, service, ReplyTicket(std::move(sink), request.id));
   }
 }
 

@@ -49,7 +49,7 @@ TEST(TarnReportingClient, ConnectsToAListeningSocket) {
   EXPECT_TRUE(connected.client->connected());
   ScriptedServer server(::accept(listener, nullptr, nullptr));
   const Served serving([&] { server.acknowledge(1); });
-  EXPECT_TRUE(connected.client->createReportingSession(5).ok());
+  EXPECT_TRUE(connected.client->call(createReportingSession(5)).ok());
   ::close(listener);
 }
 
@@ -102,8 +102,8 @@ TEST(TarnReportingClient, RepliesThatCameBeforeTheEndAreStillDelivered) {
 TEST(TarnReportingClient, ACallOnALostConnectionSaysSo) {
   Pair pair;
   pair.server->hangUp();
-  EXPECT_EQ(pair.client->getAllReporters().outcome, Outcome::ConnectionLost);
-  EXPECT_EQ(pair.client->getAllReporters().outcome, Outcome::ConnectionLost);
+  EXPECT_EQ(pair.client->call(getAllReporters()).outcome, Outcome::ConnectionLost);
+  EXPECT_EQ(pair.client->call(getAllReporters()).outcome, Outcome::ConnectionLost);
   EXPECT_EQ(pair.client->send(getAllReporters()), SendStatus::NotConnected);
   EXPECT_EQ(pair.client->wait(std::chrono::seconds(5)), 0U);
 }
@@ -185,7 +185,7 @@ TEST(TarnReportingClient, TheEndOfTheConnectionIsTheReplyToKillService) {
     }
     pair.server->hangUp();
   });
-  EXPECT_TRUE(pair.client->killService().ok());
+  EXPECT_TRUE(pair.client->call(killService()).ok());
   EXPECT_EQ(outcomes.heard(), Strings{"other connection lost"});
 }
 

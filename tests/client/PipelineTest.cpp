@@ -41,7 +41,7 @@ TEST(TarnReportingClient, ACallDeliversOtherRepliesOnTheWay) {
   Outcomes outcomes;
   Pair pair;
   pair.client->send(createReportingSession(5), outcomes.handler("create"));
-  pair.client->startReportingSessionForID(5, outcomes.handler("start"));
+  pair.client->send(startReportingSessionForID(5), outcomes.handler("start"));
   const Served serving([&] {
     pair.server->acknowledge(1);
     const auto start = pair.server->take();
@@ -49,7 +49,7 @@ TEST(TarnReportingClient, ACallDeliversOtherRepliesOnTheWay) {
     pair.server->reply(start->id, {true});
     pair.server->reply(stop->id, {true});
   });
-  EXPECT_TRUE(pair.client->stopReportingSessionForID(5).ok());
+  EXPECT_TRUE(pair.client->call(stopReportingSessionForID(5)).ok());
   EXPECT_EQ(outcomes.heard(), (Strings{"create ok", "start ok"}));
 }
 
@@ -57,8 +57,8 @@ TEST(TarnReportingClient, AStartThatCanNeverBeAnsweredIsCancelled) {
   Outcomes outcomes;
   Pair pair;
   pair.client->send(createReportingSession(5));
-  pair.client->startReportingSessionForID(5, outcomes.handler("start"));
-  pair.client->startReportingSessionForID(5, outcomes.handler("again"));
+  pair.client->send(startReportingSessionForID(5), outcomes.handler("start"));
+  pair.client->send(startReportingSessionForID(5), outcomes.handler("again"));
   EXPECT_TRUE(outcomes.heard().empty());
   pair.client->dispatch();
   EXPECT_EQ(outcomes.heard(), Strings{"again cancelled"});
@@ -68,14 +68,14 @@ TEST(TarnReportingClient, AStartThatCanNeverBeAnsweredIsCancelled) {
     pair.server->take();
     pair.server->acknowledge(1);
   });
-  EXPECT_TRUE(pair.client->destroyReportingSession(5).ok());
+  EXPECT_TRUE(pair.client->call(destroyReportingSession(5)).ok());
   EXPECT_EQ(outcomes.heard(), (Strings{"again cancelled", "start cancelled"}));
 }
 
 TEST(TarnReportingClient, ErrorsReachTheHandlerWithDomainCodeAndText) {
   Pair pair;
   const Served serving([&] { pair.server->fail(pair.server->take()->id, 3, "no"); });
-  const Reply reply = pair.client->setConfiguration({}, 5);
+  const Reply reply = pair.client->call(setConfiguration({}, 5));
   EXPECT_EQ(reply.outcome, Outcome::Error);
   EXPECT_EQ(reply.error.domain, "domain");
   EXPECT_EQ(reply.error.code, 3);

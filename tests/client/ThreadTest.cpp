@@ -17,7 +17,7 @@ TEST(TarnReportingClientDeathTest, ACallInsideAHandlerEndsTheProcess) {
   EXPECT_DEATH(
       {
         Pair pair;
-        pair.client->send(getAllReporters(), [&](Reply&&) { pair.client->getAllReporters(); });
+        pair.client->send(getAllReporters(), [&](Reply&&) { pair.client->call(getAllReporters()); });
         pair.client->flush();
         pair.server->acknowledge(1);
         pair.client->wait(std::chrono::seconds(5));
@@ -48,7 +48,7 @@ TEST(TarnReportingClient, ThreadsMayUseOneClientInTurn) {
     threads.emplace_back([&] {
       for (std::size_t n = 0; n < kCalls; ++n) {
         const std::lock_guard lock(turn);
-        good += pair.client->getAllReporters().ok() ? 1U : 0U;
+        good += pair.client->call(getAllReporters()).ok() ? 1U : 0U;
       }
     });
   }

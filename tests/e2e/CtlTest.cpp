@@ -169,8 +169,8 @@ TEST_F(Ctl, AReaderThatLeavesEndsTheProgramWithoutAWord) {
 TEST_F(Ctl, StatusAndReportersTellWhatIsThere) {
   ASSERT_TRUE(startService());
   const auto client = connect();
-  ASSERT_TRUE(client->createReportingSession(-5).ok());
-  ASSERT_TRUE(client->createReportingSession(6).ok());
+  ASSERT_TRUE(client->call(client::createReportingSession(-5)).ok());
+  ASSERT_TRUE(client->call(client::createReportingSession(6)).ok());
   EXPECT_EQ(ctl({"reporters"}).output, "-5\n6\n");
   const json ledger = json::parse(ctl({"status", "--json"}).output);
   EXPECT_EQ(ledger.at("sessions"), 2);

@@ -41,12 +41,14 @@ class DriverChannels : public ServiceFixture {
     if (!client_) {
       client_ = connect();
     }
-    ASSERT_TRUE(client_->createReportingSession(reporterID).ok());
-    ASSERT_TRUE(client_->setServiceType(kWisp, reporterID).ok());
-    ASSERT_EQ(client_->startReportingSessionForID(reporterID), client::SendStatus::Sent);
-    ASSERT_TRUE(client_->reporterID(reporterID).ok());  // behind it the session runs
+    ASSERT_TRUE(client_->call(client::createReportingSession(reporterID)).ok());
+    ASSERT_TRUE(client_->call(client::setServiceType(kWisp, reporterID)).ok());
+    ASSERT_EQ(client_->send(client::startReportingSessionForID(reporterID)), client::SendStatus::Sent);
+    ASSERT_TRUE(client_->call(client::reporterID(reporterID)).ok());  // behind it the session runs
   }
-  void stopSession(std::int64_t reporterID) { ASSERT_TRUE(client_->stopReportingSessionForID(reporterID).ok()); }
+  void stopSession(std::int64_t reporterID) {
+    ASSERT_TRUE(client_->call(client::stopReportingSessionForID(reporterID)).ok());
+  }
   // Expects one event of each name, with just these entries besides what the intake adds.
   void expectEvents(const std::string& type, const json& expected) {
     const std::vector<Event> found = events("sys.oxbow.*.Flume." + type);

@@ -43,14 +43,14 @@ TEST_F(RecorderFile, OnlyEventsThatSomebodyWantsAreRecorded) {
 TEST_F(RecorderFile, TheOldestEventsGoWhenTheFileGrowsTooLarge) {
   ASSERT_TRUE(startConfigured("[recorder]\nmax_megabytes = 1\n"));
   const auto client = connect();
-  ASSERT_TRUE(client->createReportingSession(1).ok());
+  ASSERT_TRUE(client->call(client::createReportingSession(1)).ok());
   const std::string text(10000, 'x');
   for (int index = 0; index < 400; ++index) {
     ASSERT_EQ(
         client->send(client::sendMessage({{"number", index}, {"text", text}}, 4, 1, std::vector<std::int64_t>{1})),
         client::SendStatus::Sent);
   }
-  ASSERT_TRUE(client->getAllReporters().ok());
+  ASSERT_TRUE(client->call(client::getAllReporters()).ok());
   ASSERT_TRUE(eventually([this] { return status().at("recorder_expired") > 0; })) << status().dump();
   const json ledger = ledgerAtRest();
   const auto left = events("*.Playback.Start");
@@ -63,12 +63,12 @@ TEST_F(RecorderFile, TheOldestEventsGoWhenTheFileGrowsTooLarge) {
 TEST_F(RecorderFile, EventsStandInTheOrderOfTheirMessages) {
   ASSERT_TRUE(startService());
   const auto client = connect();
-  ASSERT_TRUE(client->createReportingSession(1).ok());
+  ASSERT_TRUE(client->call(client::createReportingSession(1)).ok());
   for (int index = 0; index < 1000; ++index) {
     ASSERT_EQ(client->send(client::sendMessage({{"number", index}}, 4, 1, std::vector<std::int64_t>{1})),
               client::SendStatus::Sent);
   }
-  ASSERT_TRUE(client->getAllReporters().ok());
+  ASSERT_TRUE(client->call(client::getAllReporters()).ok());
   const auto found = eventsOnceThereAre(1000, "sys.oxbow.tarnkit.Playback.Start");
   ASSERT_EQ(found.size(), 1000U);
   for (std::size_t index = 0; index < found.size(); ++index) {
@@ -79,7 +79,7 @@ TEST_F(RecorderFile, EventsStandInTheOrderOfTheirMessages) {
 TEST_F(RecorderFile, TheLedgerAddsUpAtAnyMomentAndIsZeroAtRest) {
   ASSERT_TRUE(startService());
   const auto client = connect();
-  ASSERT_TRUE(client->createReportingSession(1).ok());
+  ASSERT_TRUE(client->call(client::createReportingSession(1)).ok());
   const auto watcher = connect();
   for (int round = 0; round < 50; ++round) {
     for (int index = 0; index < 100; ++index) {
@@ -93,7 +93,7 @@ TEST_F(RecorderFile, TheLedgerAddsUpAtAnyMomentAndIsZeroAtRest) {
                                                                 ledger.get("recorder_waiting").asInt64() +
                                                                 ledger.get("recorder_failed").asInt64());
   }
-  ASSERT_TRUE(client->getAllReporters().ok());
+  ASSERT_TRUE(client->call(client::getAllReporters()).ok());
   const json ledger = ledgerAtRest();
   EXPECT_EQ(ledger.at("messages_received"), 5000);
   EXPECT_EQ(ledger.at("recorder_committed"), ledger.at("recorder_handed_over"));

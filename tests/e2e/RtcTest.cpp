@@ -211,13 +211,13 @@ TEST_F(Rtc, PeriodsThatFollowEachOtherAtOnceAreMirroredEach) {
 TEST_F(Rtc, TheEndCommitsWhatTheWorkersQueuesHold) {
   ASSERT_TRUE(startConfigured(""));
   const auto client = connect();
-  ASSERT_TRUE(client->createReportingSession(1).ok());
-  ASSERT_EQ(client->startReportingSessionForID(1), client::SendStatus::Sent);
+  ASSERT_TRUE(client->call(client::createReportingSession(1)).ok());
+  ASSERT_EQ(client->send(client::startReportingSessionForID(1)), client::SendStatus::Sent);
   for (int index = 0; index < 2000; ++index) {
     ASSERT_EQ(client->send(client::sendMessage({{"number", index}}, 4, 1, std::vector<std::int64_t>{1})),
               client::SendStatus::Sent);
   }
-  ASSERT_TRUE(client->getAllReporters().ok());
+  ASSERT_TRUE(client->call(client::getAllReporters()).ok());
   EXPECT_EQ(stopService(SIGTERM), 0);
   EXPECT_EQ(rtcEvents().size(), 2001U);
   EXPECT_FALSE(logSays("are left undone"));

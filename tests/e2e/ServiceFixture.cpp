@@ -109,7 +109,7 @@ std::vector<std::string> ServiceFixture::names(const std::vector<Event>& events)
 
 json ServiceFixture::status() {
   const auto client = connect();
-  const client::Reply reply = client->status();
+  const client::Reply reply = client->call(client::status());
   EXPECT_TRUE(reply.ok()) << reply.error.text;
   std::string text;
   plist::appendJson(text, reply.dictionary());

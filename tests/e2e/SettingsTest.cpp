@@ -112,12 +112,12 @@ class SettingsInASession : public ServiceFixture {
   void SetUp() override {
     ASSERT_TRUE(startService({"--log-level", "debug"}));
     client_ = connect();
-    ASSERT_TRUE(client_->createReportingSession(1).ok());
+    ASSERT_TRUE(client_->call(client::createReportingSession(1)).ok());
     startSession();
   }
   void startSession() {
-    ASSERT_EQ(client_->startReportingSessionForID(1), client::SendStatus::Sent);
-    ASSERT_TRUE(client_->getAllReporters().ok());  // so the session has started
+    ASSERT_EQ(client_->send(client::startReportingSessionForID(1)), client::SendStatus::Sent);
+    ASSERT_TRUE(client_->call(client::getAllReporters()).ok());  // so the session has started
   }
   // What came for settings, once there are so many and nothing is under way any more.
   std::vector<json> settings(std::size_t count) {
@@ -173,14 +173,14 @@ TEST_F(SettingsInASession, ANotificationWithoutAChangeBringsNoMessage) {
 }
 
 TEST_F(SettingsInASession, AStoppedSessionHearsOfNoSetting) {
-  ASSERT_TRUE(client_->stopReportingSessionForID(1).ok());
+  ASSERT_TRUE(client_->call(client::stopReportingSessionForID(1)).ok());
   ASSERT_EQ(ctl({"notify", "sys.oxbow.homeshell.ringerstate", "--state", "1"}).status, 0);
   ASSERT_TRUE(eventually([&] { return logSays("Updating value featureName=ringerstate"); }));
   EXPECT_TRUE(settings(0).empty());
 }
 
 TEST_F(SettingsInASession, ASecondStartBringsTheSettingsThatAreKnown) {
-  ASSERT_TRUE(client_->stopReportingSessionForID(1).ok());
+  ASSERT_TRUE(client_->call(client::stopReportingSessionForID(1)).ok());
   ASSERT_EQ(ctl({"notify", "sys.oxbow.homeshell.ringerstate", "--state", "2"}).status, 0);
   ASSERT_TRUE(eventually([&] { return logSays("Updating value featureName=ringerstate"); }));
   startSession();

@@ -19,12 +19,13 @@ class Snare : public ServiceFixture {
     if (!client_) {
       client_ = connect();
     }
-    ASSERT_TRUE(client_->createReportingSession(reporterID).ok());
-    ASSERT_TRUE(client_->setServiceType(type, reporterID).ok());
-    ASSERT_EQ(client_->startReportingSessionForID(reporterID), client::SendStatus::Sent);
+    ASSERT_TRUE(client_->call(client::createReportingSession(reporterID)).ok());
+    ASSERT_TRUE(client_->call(client::setServiceType(type, reporterID)).ok());
+    ASSERT_EQ(client_->send(client::startReportingSessionForID(reporterID)), client::SendStatus::Sent);
   }
   void send(std::int64_t reporterID, std::uint32_t category, std::uint16_t type, const plist::Dictionary& message) {
-    ASSERT_TRUE(client_->sendMessage(message, category, type, std::vector<std::int64_t>{reporterID}).ok());
+    ASSERT_TRUE(
+        client_->call(client::sendMessage(message, category, type, std::vector<std::int64_t>{reporterID})).ok());
   }
   void sendHapticLeak(std::int64_t reporterID, int n) {
     send(reporterID, kPlayback, kWattlog, {{"Haptic_Active_Hardware_Time_Seconds", 90}, {"n", n}});
@@ -110,7 +111,9 @@ TEST_F(Snare, StuckSystemSoundsMakeOneSnapshotInFifteenSeconds) {
 TEST_F(Snare, AMessageWithoutASessionIsWatchedToo) {
   ASSERT_TRUE(startOn(R"({"InternalBuild": true})"));
   client_ = connect();
-  ASSERT_TRUE(client_->sendMessage({{"System_Sound_Stuck_Time_Seconds", 30}}, kPlayback, kWattlog, std::nullopt).ok());
+  ASSERT_TRUE(
+      client_->call(client::sendMessage({{"System_Sound_Stuck_Time_Seconds", 30}}, kPlayback, kWattlog, std::nullopt))
+          .ok());
   EXPECT_EQ(captures().size(), 1U);
 }
 
@@ -123,7 +126,7 @@ TEST_F(Snare, TheCaptureOfAQuietAlarmIsCancelledAtItsStop) {
   const std::string log = serviceLog();
   std::smatch identifier;
   ASSERT_TRUE(std::regex_search(log, identifier, std::regex(started + "([0-9A-F-]+) timeout=60.000000 response=")));
-  ASSERT_TRUE(client_->stopReportingSessionForID(1).ok());
+  ASSERT_TRUE(client_->call(client::stopReportingSessionForID(1)).ok());
   const auto found = captures();
   ASSERT_EQ(found.size(), 2U);
   EXPECT_EQ(found[0].name, "startSession");
@@ -162,7 +165,7 @@ TEST_F(Snare, OtherBuildsAskForNothing) {
   sendHapticLeak(1, 2);
   sendStuckSound(1, 1);
   sendLowRms(1, 3);
-  ASSERT_TRUE(client_->stopReportingSessionForID(1).ok());
+  ASSERT_TRUE(client_->call(client::stopReportingSessionForID(1)).ok());
   EXPECT_TRUE(captures().empty());
   EXPECT_FALSE(logSays(" tarnrb "));
 }
@@ -176,7 +179,7 @@ TEST_F(Snare, RefusesWithTheConfiguredReason) {
       waitForLog("Started Snare session for alarm Low RMS. sessionId=NONE_RETURNED timeout=60.000000 "
                  "response={success = 0; reasonCode = 6}"));
   EXPECT_TRUE(logSays("Failed starting snare session. reason=kAilmentErrorDailyLimitExceeded"));
-  ASSERT_TRUE(client_->stopReportingSessionForID(1).ok());
+  ASSERT_TRUE(client_->call(client::stopReportingSessionForID(1)).ok());
   const auto found = captures();
   ASSERT_EQ(found.size(), 2U);
   EXPECT_EQ(found[0].name, "startSession");

@@ -19,10 +19,10 @@ class StartAndStop : public ServiceFixture {
   // A session that runs, with that many different messages, over a connection that stays open.
   std::unique_ptr<client::TarnReportingClient> sendMessages(int count) {
     auto client = connect();
-    EXPECT_TRUE(client->createReportingSession(1).ok());
-    EXPECT_EQ(client->startReportingSessionForID(1), client::SendStatus::Sent);
+    EXPECT_TRUE(client->call(client::createReportingSession(1)).ok());
+    EXPECT_EQ(client->send(client::startReportingSessionForID(1)), client::SendStatus::Sent);
     for (int index = 0; index < count; ++index) {
-      EXPECT_TRUE(client->sendMessage({{"number", index}}, 4, 1, std::vector<std::int64_t>{1}).ok());
+      EXPECT_TRUE(client->call(client::sendMessage({{"number", index}}, 4, 1, std::vector<std::int64_t>{1})).ok());
     }
     return client;
   }

@@ -57,7 +57,7 @@ ServiceWatch::ServiceWatch(const std::string& socket, double patienceSeconds) {
 json ServiceWatch::ledgerAtRest(double patienceSeconds, std::size_t leastEvents) {
   const auto deadline = deadlineIn(patienceSeconds);
   while (true) {
-    const client::Reply reply = client_->status();
+    const client::Reply reply = client_->call(client::status());
     if (!reply.ok()) {
       throw std::runtime_error("the service doesn't tell its status: " + reply.error.text);
     }

@@ -4,27 +4,56 @@
 #include <CLI/CLI.hpp>
 #include <cerrno>
 #include <memory>
+#include <string>
+#include <string_view>
 #include <system_error>
 
 #include "tools/ctl/Command.h"
 #include "tools/ctl/ExitStatus.h"
 #include "tools/ctl/Output.h"
 #include "tools/ctl/ScriptPlayer.h"
+#include "wire/Request.h"
 
 namespace tarn::ctl {
 
 namespace {
 
-constexpr const char* kHelp = R"(
+constexpr std::size_t kNameWidth = 30;
+
+std::string operationLine(std::string_view name, const std::string& members) {
+  std::string line = "    " + std::string(name);
+  if (!members.empty()) {
+    line.resize(4 + kNameWidth, ' ');
+  }
+  return line + members + "\n";
+}
+
+std::string operationLine(const wire::OperationRow& row) {
+  std::string members;
+  for (const wire::Argument argument : row.arguments) {
+    members += (members.empty() ? "\"" : ", \"") + std::string(wire::rowOf(argument).name) + "\"";
+  }
+  return operationLine(row.name, members);
+}
+
+std::string operationLines() {
+  std::string lines;
+  for (const wire::OperationRow& row : wire::kOperations) {
+    lines += row.servedBy == wire::ServedBy::Service ? operationLine(row) : "";
+  }
+  return lines + operationLine("sleep", "\"seconds\"") + operationLine("disconnect", "");
+}
+
+constexpr const char* kHelpBefore = R"(
 A script is one JSON object a line; blank lines are passed over.
-  "op"      createReportingSession, setServiceType, getServiceNameForReporterID, setConfiguration,
-            startReportingSessionForID, sendMessage, stopReportingSessionForID, destroyReportingSession,
-            reporterID, getAllReporters, killService; sleep ("seconds"), disconnect
   "client"  the connection, "main" when left out; each name is a connection of its own
-  arguments "reporterID", "serviceType", "configuration", "message", "category", "type", "reporterIDs" (left out:
-            every running session); categories, types and service types by number or name
   values    JSON integers are integers, other numbers doubles; {"$date": seconds} is a date,
             {"$data": "base64"} is data
+  "op"      one of these, each with the members that are its arguments:
+)";
+
+constexpr const char* kHelpAfter = R"(
+"reporterIDs" may be left out: every running session. Categories, types and service types by number or name.
 
 Each line waits for its reply, except a start (its reply comes at the stop) and killService (it has none). Replies are
 printed as they arrive, one JSON object a line: client, line, op, error, result. A reply that carries an error is a
@@ -81,7 +110,7 @@ void addRunCommand(CLI::App& app, Context& context) {
   CLI::App* command = app.add_subcommand("run", "Play a script against the service and print each reply");
   const auto path = std::make_shared<std::string>("-");
   command->add_option("FILE", *path, "The script; standard input when left out or -");
-  command->footer(kHelp);
+  command->footer(kHelpBefore + operationLines() + kHelpAfter);
   command->callback([&context, path] { context.chosen = [&context, path] { return run(context, *path); }; });
 }
 

@@ -154,8 +154,9 @@ bool ScriptPlayer::playRequest(const ScriptStep& step) {
   if (connection == nullptr || !settleStarts(connection)) {
     return false;
   }
-  const bool isStart = step.request.operation == wire::Operation::StartReportingSessionForID;
-  const bool isKill = step.request.operation == wire::Operation::KillService;
+  const wire::Result result = wire::rowOf(step.request.operation).result;
+  const bool isStart = result == wire::Result::TrueAtStop;
+  const bool isKill = result == wire::Result::NoReply;
   const auto done = std::make_shared<bool>(false);
   // The handler of a start outlives this step, so it keeps what it prints; a message need not be kept for that.
   ScriptStep named = step;

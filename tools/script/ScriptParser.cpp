@@ -1,7 +1,6 @@
 #include "tools/script/ScriptParser.h"
 
 #include <algorithm>
-#include <array>
 #include <cmath>
 #include <cstdint>
 #include <limits>
@@ -19,45 +18,26 @@ namespace {
 using plist::Kind;
 using plist::ValueView;
 
-// The members that a line may have.
-using Member = unsigned;
-constexpr Member kReporterID = 1U << 0U;
-constexpr Member kServiceType = 1U << 1U;
-constexpr Member kConfiguration = 1U << 2U;
-constexpr Member kMessage = 1U << 3U;
-constexpr Member kCategory = 1U << 4U;
-constexpr Member kType = 1U << 5U;
-constexpr Member kReporterIDs = 1U << 6U;
-constexpr Member kSeconds = 1U << 7U;
+using wire::ArgumentRow;
 
-struct MemberRow {
-  std::string_view name;
-  Member member;
-};
-constexpr std::array kMembers = {
-    MemberRow{"reporterID", kReporterID},       MemberRow{"serviceType", kServiceType},
-    MemberRow{"configuration", kConfiguration}, MemberRow{"message", kMessage},
-    MemberRow{"category", kCategory},           MemberRow{"type", kType},
-    MemberRow{"reporterIDs", kReporterIDs},     MemberRow{"seconds", kSeconds},
-};
-
+// What a line that is no request may have.
+constexpr std::string_view kSeconds = "seconds";
 constexpr double kMaxSleepSeconds = 86400.0 * 365;
 
-unsigned membersOf(wire::Operation operation) {
-  switch (operation) {
-    case wire::Operation::SetServiceType:
-      return kServiceType | kReporterID;
-    case wire::Operation::SetConfiguration:
-      return kConfiguration | kReporterID;
-    case wire::Operation::SendMessage:
-      return kMessage | kCategory | kType | kReporterIDs;
-    case wire::Operation::GetAllReporters:
-    case wire::Operation::KillService:
-    case wire::Operation::Status:
-      return 0;
+// The names that a line may write for the argument's numbers.
+const NameTable& namesOf(const ArgumentRow& row) {
+  switch (row.argument) {
+    case wire::Argument::ServiceType:
+      return serviceTypeNames();
+    case wire::Argument::Category:
+      return categoryNames();
     default:
-      return kReporterID;
+      return typeNames();
   }
+}
+
+bool mayBeLeftOut(const ArgumentRow& row) {
+  return std::holds_alternative<wire::ReporterIDs wire::Request::*>(row.member);
 }
 
 std::string quoted(std::string_view text) {
@@ -110,22 +90,24 @@ class LineReader {
   bool failMember(std::string_view name, const ValueView& value, std::string_view expected) {
     return fail("member " + quoted(name) + " is " + shown(value), expected);
   }
-  bool has(Member member) const { return (allowed_ & member) != 0; }
+  bool takes(const ArgumentRow& row) const { return arguments_.contains(row.argument); }
+  bool takesSeconds() const { return step_.kind == ScriptStep::Kind::Sleep; }
+  bool takesMember(std::string_view name) const;
 
   bool readOp();
   bool readClient();
   bool checkMembers();
   bool readArguments();
-  bool readReporterID();
-  bool readReporterIDs();
   bool readSeconds();
-  bool readDictionary(std::string_view name);
+  bool read(const ArgumentRow& row, std::int64_t& number);
+  bool read(const ArgumentRow& row, wire::ReporterIDs& numbers);
+  bool read(const ArgumentRow& row, plist::Dictionary& dictionary);
   template <class Number>
-  bool readNumberOrName(std::string_view name, const NameTable& names, Number& number);
+  bool read(const ArgumentRow& row, Number& number);
 
   const plist::Dictionary& members_;
   ScriptStep& step_;
-  unsigned allowed_ = 0;
+  wire::ArgumentList arguments_{};  // of the line's operation
   std::string fault_;
 };
 
@@ -140,7 +122,6 @@ bool LineReader::readOp() {
   step_.op = op.text();
   if (step_.op == "sleep") {
     step_.kind = ScriptStep::Kind::Sleep;
-    allowed_ = kSeconds;
     return true;
   }
   if (step_.op == "disconnect") {
@@ -148,11 +129,11 @@ bool LineReader::readOp() {
     return true;
   }
   const auto operation = wire::operationFromName(step_.op);
-  if (!operation || *operation == wire::Operation::Status) {
+  if (!operation || wire::rowOf(*operation).servedBy == wire::ServedBy::Host) {
     return failMember("op", op, R"(a remote operation, "sleep" or "disconnect")");
   }
   step_.request.operation = *operation;
-  allowed_ = membersOf(*operation);
+  arguments_ = wire::rowOf(*operation).arguments;
   return true;
 }
 
@@ -169,90 +150,94 @@ bool LineReader::readClient() {
   return true;
 }
 
+bool LineReader::takesMember(std::string_view name) const {
+  return name == "op" || name == "client" || (takesSeconds() && name == kSeconds) ||
+         std::any_of(wire::kArguments.begin(), wire::kArguments.end(),
+                     [&](const ArgumentRow& row) { return row.name == name && takes(row); });
+}
+
 // Whether every member is one that the operation has, and every one that it needs is there.
 bool LineReader::checkMembers() {
+  std::string taken = R"("op", "client")";
+  std::optional<std::string_view> missing;
+  const auto note = [&](std::string_view name, bool isNeeded) {
+    taken += ", " + quoted(name);
+    if (isNeeded && !missing && !members_.contains(name)) missing = name;
+  };
+  for (const ArgumentRow& row : wire::kArguments) {
+    if (takes(row)) note(row.name, !mayBeLeftOut(row));
+  }
+  if (takesSeconds()) note(kSeconds, true);
   for (const auto& entry : members_) {
-    const std::string_view name = entry.key.text();
-    const auto* row = std::find_if(kMembers.begin(), kMembers.end(), [&](const auto& one) { return one.name == name; });
-    const bool isKnown = row != kMembers.end() && has(row->member);
-    if (!isKnown && name != "op" && name != "client") {
-      std::string expected = R"(only "op", "client")";
-      for (const auto& one : kMembers) {
-        expected += has(one.member) ? ", " + quoted(one.name) : "";
-      }
-      return fail(step_.op + " has no member " + quoted(name), expected);
+    if (!takesMember(entry.key.text())) {
+      return fail(step_.op + " has no member " + quoted(entry.key.text()), "only " + taken);
     }
   }
-  for (const auto& row : kMembers) {
-    if (has(row.member) && row.member != kReporterIDs && !members_.contains(row.name)) {
-      return fail(step_.op + " lacks the member " + quoted(row.name), "it in every such line");
-    }
-  }
-  return true;
+  return !missing || fail(step_.op + " lacks the member " + quoted(*missing), "it in every such line");
 }
 
 bool LineReader::readArguments() {
-  wire::Request& request = step_.request;
-  return (!has(kReporterID) || readReporterID()) &&
-         (!has(kServiceType) || readNumberOrName("serviceType", serviceTypeNames(), request.serviceType)) &&
-         (!has(kConfiguration) || readDictionary("configuration")) && (!has(kMessage) || readDictionary("message")) &&
-         (!has(kCategory) || readNumberOrName("category", categoryNames(), request.category)) &&
-         (!has(kType) || readNumberOrName("type", typeNames(), request.type)) &&
-         (!has(kReporterIDs) || readReporterIDs()) && (!has(kSeconds) || readSeconds());
+  const auto readOne = [&](const ArgumentRow& row) {
+    return std::visit([&](auto member) { return read(row, step_.request.*member); }, row.member);
+  };
+  return std::all_of(wire::kArguments.begin(), wire::kArguments.end(),
+                     [&](const ArgumentRow& row) { return !takes(row) || readOne(row); }) &&
+         (!takesSeconds() || readSeconds());
 }
 
-bool LineReader::readReporterID() {
-  const ValueView value = members_.get("reporterID");
-  const auto number = reporterIDFrom(value);
-  if (!number) {
-    return failMember("reporterID", value, "an integer from -2^63 to 2^63-1");
+bool LineReader::read(const ArgumentRow& row, std::int64_t& number) {
+  const ValueView value = members_.get(row.name);
+  const auto found = reporterIDFrom(value);
+  if (!found) {
+    return failMember(row.name, value, "an integer from -2^63 to 2^63-1");
   }
-  step_.request.reporterID = *number;
+  number = *found;
   return true;
 }
 
-bool LineReader::readReporterIDs() {
-  const ValueView value = members_.get("reporterIDs");
+bool LineReader::read(const ArgumentRow& row, wire::ReporterIDs& numbers) {
+  const ValueView value = members_.get(row.name);
   if (!value.present()) {
     return true;
   }
   if (value.kind() != Kind::Array) {
-    return failMember("reporterIDs", value, "an array of integers");
+    return failMember(row.name, value, "an array of integers");
   }
-  auto& numbers = step_.request.reporterIDs.emplace();
+  numbers.emplace();
   for (const ValueView item : value.array()) {
     const auto number = reporterIDFrom(item);
     if (!number) {
-      return failMember("reporterIDs", value, "an array of integers from -2^63 to 2^63-1");
+      return failMember(row.name, value, "an array of integers from -2^63 to 2^63-1");
     }
-    numbers.push_back(*number);
+    numbers->push_back(*number);
   }
   return true;
 }
 
 bool LineReader::readSeconds() {
-  const ValueView value = members_.get("seconds");
+  const ValueView value = members_.get(kSeconds);
   const bool isNumber = isInteger(value) || value.kind() == Kind::Double;
   step_.seconds = value.asDouble();
   if (!isNumber || !(step_.seconds >= 0 && step_.seconds <= kMaxSleepSeconds)) {
-    return failMember("seconds", value, "a number from 0 to a year of seconds");
+    return failMember(kSeconds, value, "a number from 0 to a year of seconds");
   }
   return true;
 }
 
-bool LineReader::readDictionary(std::string_view name) {
-  const ValueView value = members_.get(name);
+bool LineReader::read(const ArgumentRow& row, plist::Dictionary& dictionary) {
+  const ValueView value = members_.get(row.name);
   if (value.kind() != Kind::Dictionary) {
-    return failMember(name, value, "an object");
+    return failMember(row.name, value, "an object");
   }
-  step_.request.dictionary = value.dictionary();
+  dictionary = value.dictionary();
   return true;
 }
 
 template <class Number>
-bool LineReader::readNumberOrName(std::string_view name, const NameTable& names, Number& number) {
+bool LineReader::read(const ArgumentRow& row, Number& number) {
   constexpr std::uint64_t kMax = std::numeric_limits<Number>::max();
-  const ValueView value = members_.get(name);
+  const NameTable& names = namesOf(row);
+  const ValueView value = members_.get(row.name);
   std::optional<std::uint64_t> found;
   if (value.isText()) {
     found = names.numberOf(value.text());
@@ -260,7 +245,7 @@ bool LineReader::readNumberOrName(std::string_view name, const NameTable& names,
     found = value.asUInt64();
   }
   if (!found || *found > kMax) {
-    return failMember(name, value, "an integer from 0 to " + std::to_string(kMax) + " or one of " + names.listed());
+    return failMember(row.name, value, "an integer from 0 to " + std::to_string(kMax) + " or one of " + names.listed());
   }
   number = static_cast<Number>(*found);
   return true;
