@@ -1,25 +1,25 @@
 #include "client/Reply.h"
 
+#include <utility>
+
 namespace tarn::client {
 
-std::string_view outcomeName(Outcome outcome) noexcept {
-  switch (outcome) {
-    case Outcome::Ok:
-      return "ok";
-    case Outcome::Error:
-      return "error";
-    case Outcome::Cancelled:
-      return "cancelled";
-    case Outcome::ConnectionLost:
-      return "connection lost";
-    case Outcome::TimedOut:
-      return "timed out";
-    case Outcome::Full:
-      return "full";
-    case Outcome::TooLarge:
-      return "too large";
+Reply failure(Outcome outcome, std::string text) {
+  Reply reply;
+  reply.outcome = outcome;
+  reply.error.text = std::move(text);
+  return reply;
+}
+
+Reply notSent(tarnkit::SendStatus status) {
+  switch (status) {
+    case tarnkit::SendStatus::Full:
+      return failure(Outcome::Full, "too many requests are outstanding");
+    case tarnkit::SendStatus::TooLarge:
+      return failure(Outcome::TooLarge, "the request is longer than a frame may be");
+    default:
+      return failure(Outcome::ConnectionLost, "the connection has ended");
   }
-  return "unknown";
 }
 
 std::int64_t Reply::number() const noexcept {

@@ -1,29 +1,21 @@
-// Reply: what became of a request, as the client library hands it to the owner.
+// Reply: what became of a request, with values of the wire.
 #pragma once
 
 #include <cstdint>
 #include <functional>
 #include <string>
-#include <string_view>
 #include <vector>
 
 #include "plist/Value.h"
 #include "wire/ReplyDecoder.h"
 
+#include <tarnkit/Options.h>
+#include <tarnkit/Reply.h>
+
 namespace tarn::client {
 
-enum class Outcome : std::uint8_t {
-  Ok,
-  Error,           // the service answered with an error
-  Cancelled,       // no reply can come any more: a held start whose session went away, or the owner closed
-  ConnectionLost,  // the connection ended before the reply came
-  TimedOut,        // call() gave up waiting; a reply that still comes is dropped
-  Full,            // not sent: too many requests are outstanding
-  TooLarge,        // not sent: the request is longer than a frame may be
-};
-
-// "ok", "error", "cancelled", "connection lost", "timed out", "full", "too large". The text lives for ever.
-std::string_view outcomeName(Outcome outcome) noexcept;
+using tarnkit::Outcome;
+using tarnkit::outcomeName;
 
 struct Reply {
   Outcome outcome = Outcome::Ok;
@@ -36,6 +28,10 @@ struct Reply {
   plist::Dictionary dictionary() const noexcept;
   std::vector<std::int64_t> numbers() const;
 };
+
+// What a failure and a request that was not sent become.
+Reply failure(Outcome outcome, std::string text);
+Reply notSent(tarnkit::SendStatus status);
 
 // Called once for each request that was sent, on the owner's thread.
 using ReplyHandler = std::function<void(Reply&& reply)>;

@@ -7,27 +7,7 @@
 
 namespace tarn::client {
 
-namespace {
-
-Reply failure(Outcome outcome, std::string text) {
-  Reply reply;
-  reply.outcome = outcome;
-  reply.error.text = std::move(text);
-  return reply;
-}
-
-Reply notSent(SendStatus status) {
-  switch (status) {
-    case SendStatus::Full:
-      return failure(Outcome::Full, "too many requests are outstanding");
-    case SendStatus::TooLarge:
-      return failure(Outcome::TooLarge, "the request is longer than a frame may be");
-    default:
-      return failure(Outcome::ConnectionLost, "the connection has ended");
-  }
-}
-
-}  // namespace
+static_assert(Options().maxFrameBytes == wire::kDefaultMaxFrameBytes);
 
 TarnReportingClient::Connected TarnReportingClient::connect(const std::string& path, const Options& options) {
   Connected connected;
@@ -93,16 +73,6 @@ SendStatus TarnReportingClient::trySend(const Request& request, ReplyHandler han
     writeSome();
   }
   return status;
-}
-
-std::future<Reply> TarnReportingClient::sendForFuture(const Request& request) {
-  auto promise = std::make_shared<std::promise<Reply>>();
-  std::future<Reply> future = promise->get_future();
-  const SendStatus status = send(request, [promise](Reply&& reply) { promise->set_value(std::move(reply)); });
-  if (status != SendStatus::Sent) {
-    promise->set_value(notSent(status));
-  }
-  return future;
 }
 
 bool TarnReportingClient::flush() {

@@ -1,28 +1,11 @@
-// TarnReportingClient: one connection to the reporting service.
-//
-// The owner drives it: there is no thread inside, a reply is read by whoever waits for it. So a call costs one write
-// and one read and no hand-over between threads, and an owner with an event loop watches fd() and calls dispatch().
-//
-//   call()              write, then read until that reply is there; other replies are delivered on the way
-//   send(), trySend()   append to the outgoing buffer; written by flush(), or once autoFlushBytes have gathered
-//   dispatch(), wait()  write what can be written, read what is there, deliver
-//
-// Handlers run on the owner's thread, inside call, send, flush, dispatch, wait and close, never inside trySend. A
-// handler may send, trySend and close; inside a handler send doesn't wait either. It may not call, flush, dispatch,
-// wait or destroy the client: that, like use by two threads at once, ends the process with a message. Different threads
-// may use one client in turn.
-//
-// Every request that was sent has its handler called exactly once: with the reply, with ConnectionLost when the
-// connection ends (then the lost handler is called once, after them), or with Cancelled at close(). A start's reply is
-// held by the service until the session stops; when it can never come (the session was destroyed, replaced or retyped,
-// or was running already) the handler gets Cancelled. SIGPIPE is never raised. Connecting anew is the owner's choice.
+// TarnReportingClient: what tarnkit::TarnReportingClient stands on, and the tools with it: the same client with the
+// requests and values of the wire. What it promises stands in its public header.
 #pragma once
 
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <functional>
-#include <future>
 #include <memory>
 #include <optional>
 #include <string>
@@ -36,22 +19,12 @@
 #include "wire/FrameBuffer.h"
 #include "wire/ReplyDecoder.h"
 
+#include <tarnkit/Options.h>
+
 namespace tarn::client {
 
-struct Options {
-  std::size_t maxFrameBytes = wire::kDefaultMaxFrameBytes;  // longer requests aren't sent: the service would cut us off
-  std::size_t maxReplyBytes = std::size_t{64} << 20U;       // a longer reply ends the connection
-  std::size_t maxOutgoingBytes = std::size_t{4} << 20U;     // beyond: send waits, trySend says Full
-  std::size_t maxOutstanding = 65536;                       // likewise; starts that are held have a count of their own
-  std::size_t autoFlushBytes = 65536;                       // 0: every send is a write of its own
-};
-
-enum class SendStatus : std::uint8_t {
-  Sent,          // the handler will be called
-  Full,          // a bound is reached; try again after dispatch() or wait()
-  TooLarge,      // longer than a frame may be
-  NotConnected,  // the connection has ended
-};
+using tarnkit::Options;
+using tarnkit::SendStatus;
 
 class TarnReportingClient {
  public:
@@ -76,35 +49,20 @@ class TarnReportingClient {
 
   void setLostHandler(LostHandler handler);
 
-  // Sends a request (one of Requests.h) and waits for the reply, at most so long. Everything sent before is written
-  // first.
   Reply call(const Request& request, std::optional<Milliseconds> timeout = std::nullopt);
-  // Sends; where a bound is reached waits until the service has taken or answered enough. Not Sent: the handler is
-  // never called.
   SendStatus send(const Request& request, ReplyHandler handler = {});
-  // Never waits and never reads. What it allocates is bounded by the options.
   SendStatus trySend(const Request& request, ReplyHandler handler = {});
-  // The reply as a future, which becomes ready while the owner drives the client.
-  std::future<Reply> sendForFuture(const Request& request);
 
-  // Writes everything that is waiting; reads and delivers replies while the service doesn't take it. False when the
-  // connection is lost.
   bool flush();
-  // Writes and reads what can be without waiting. Returns how many handlers were called.
   std::size_t dispatch();
-  // Waits until there is something to write or read, at most so long, then does what dispatch does.
   std::size_t wait(Milliseconds timeout);
 
-  // For poll(): readable always matters, writable while wantsToWrite(). -1 once the connection is over.
   int fd() const noexcept { return socket_.fd(); }
   bool wantsToWrite() const noexcept { return outgoing_.size() > written_; }
   bool connected() const noexcept { return socket_.open(); }
-  // Requests whose handlers are still to be called, held starts included.
   std::size_t outstanding() const noexcept { return pending_.size(); }
-  // Replies that nobody waited for, and were dropped.
   std::uint64_t unmatchedReplies() const noexcept { return unmatchedReplies_; }
 
-  // Ends the connection. What is still outgoing is not written: flush() first. Outstanding requests are Cancelled.
   void close();
 
  private:

@@ -82,20 +82,6 @@ TEST(TarnReportingClient, ErrorsReachTheHandlerWithDomainCodeAndText) {
   EXPECT_EQ(reply.error.text, "no");
 }
 
-TEST(TarnReportingClient, FuturesBecomeReadyWhileTheOwnerDrives) {
-  Pair pair;
-  std::future<Reply> first = pair.client->sendForFuture(getAllReporters());
-  std::future<Reply> second = pair.client->sendForFuture(getAllReporters());
-  pair.client->flush();
-  pair.server->acknowledge(1);
-  pair.client->wait(std::chrono::seconds(5));
-  ASSERT_EQ(first.wait_for(std::chrono::seconds(0)), std::future_status::ready);
-  EXPECT_TRUE(first.get().ok());
-  pair.client->close();
-  EXPECT_EQ(second.get().outcome, Outcome::Cancelled);
-  EXPECT_EQ(pair.client->sendForFuture(getAllReporters()).get().outcome, Outcome::ConnectionLost);
-}
-
 TEST(TarnReportingClient, ACallThatTimesOutDropsItsLateReply) {
   Pair pair;
   EXPECT_EQ(pair.client->call(getAllReporters(), std::chrono::milliseconds(1)).outcome, Outcome::TimedOut);

@@ -114,6 +114,18 @@ class IncludeGraph(unittest.TestCase):
         self.assertEqual(found(include_graph, {"client/Socket.cpp": line}), [])
         self.assertEqual(found(include_graph, {"wire/FrameBuffer.cpp": line}), [("wire/FrameBuffer.cpp", 1)])
 
+    def test_public_headers_stand_on_nothing_else_of_ours(self):
+        public = {"client/include/tarnkit/Value.h": ONCE}
+        line = "#include <tarnkit/Value.h>\n"
+        for path in ("client/include/tarnkit/Reply.h", "client/tarnkit/Values.h"):
+            self.assertEqual(found(include_graph, {**public, path: ONCE + line}), [])
+        self.assertEqual(found(include_graph, {**public, "wire/A.cpp": line}), [("wire/A.cpp", 1)])
+        self.assertEqual(found(include_graph, {"plist/Value.h": ONCE, "client/include/tarnkit/Reply.h":
+                                               ONCE + '#include "plist/Value.h"\n'}),
+                         [("client/include/tarnkit/Reply.h", 2)])
+        self.assertEqual(found(include_graph, {"client/tarnkit/A.cpp": "#include <tarnkit/Gone.h>\n"}),
+                         [("client/tarnkit/A.cpp", 1)])
+
     def test_a_circle_is_reported(self):
         self.assertEqual(found(include_graph, {
             "wire/A.h": ONCE + '#include "wire/B.h"\n',

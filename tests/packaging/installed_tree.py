@@ -15,8 +15,10 @@ FILES = (
     "etc/tarnreporting/tarnreportingd.toml",
     "lib/tarnkit/traceanalysis.so", "share/doc/tarnkit/LICENSE", "share/doc/tarnkit/README.md",
     "share/doc/tarnkit/operations.md", "share/doc/tarnkit/wire.md",
-    "include/tarnkit/client/TarnReportingClient.h", "include/tarnkit/wire/Operation.h", "include/tarnkit/plist/Value.h",
 )
+# All of them: what isn't here is nobody else's.
+HEADERS = {"include/tarnkit/" + name for name in ("Options.h", "Reply.h", "Requests.h", "TarnReportingClient.h",
+                                                  "Value.h")}
 LIBRARIES = ("libtarn_client.a", "libtarn_wire.a", "libtarn_plist.a", "cmake/tarnkit/tarnkit-config.cmake",
              "cmake/tarnkit/tarnkit-config-version.cmake")
 
@@ -43,6 +45,12 @@ class InstalledTree(unittest.TestCase):
         for path in [*FILES, *(f"{options.libdir}/{name}" for name in LIBRARIES)]:
             with self.subTest(path):
                 self.assertTrue(os.path.getsize(self.at(path)) > 0)
+
+    def test_no_header_but_the_public_ones_is_installed(self):
+        found = {os.path.relpath(os.path.join(folder, name), self.prefix)
+                 for folder, _, names in os.walk(self.prefix) for name in names
+                 if folder.startswith(self.at("include")) or name.endswith((".h", ".hpp"))}
+        self.assertEqual(found, HEADERS)
 
     def test_the_programs_start_and_tell_their_help(self):
         for name in PROGRAMS:

@@ -26,7 +26,10 @@ ROOMS = {
     "plist": (),
     "plist/formats": ("plist",),
     "wire": ("plist",),
-    "client": ("plist", "wire"),
+    # What outside programs see stands on nothing else of ours.
+    "client/include/tarnkit": (),
+    "client": ("plist", "wire", "client/include/tarnkit"),
+    "client/tarnkit": ("plist", "wire", "client", "client/include/tarnkit"),
     "platform": VALUES,
     "service/vocabulary": BASE,
     "session": BASE + ("service/vocabulary",),
@@ -57,7 +60,8 @@ TRIALS = ("tests", "bench", "fuzz")
 ENTRY = "service/main.cpp"
 
 # Rooms that stand on the standard library alone, so that they move to another platform as they are.
-PORTABLE = set(SESSION + WORKERS) | {"service", "wire", "client", "testing", "testing/backends"}
+PORTABLE = set(SESSION + WORKERS) | {"service", "wire", "client", "client/include/tarnkit", "client/tarnkit", "testing",
+                                     "testing/backends"}
 
 # A concrete worker is known to its own source, to the table of classes and to tests; everyone else meets an interface.
 CONCRETE_WORKER = re.compile(r"/TarnReportingSession[A-Za-z]+Worker\.h$")
@@ -93,11 +97,13 @@ def may_include(path, room, wanted):
 
 
 def includes(text):
-    """(line, path, whether in quotes) for each include of a file."""
+    """(line, path, whether it is ours) for each include of a file. Public headers go by their installed names."""
     code = code_only(text)
     for match in INCLUDE.finditer(code):
-        yield code.count("\n", 0, match.start(1 if match.group(1) else 2)) + 1, match.group(1) or match.group(2), \
-            bool(match.group(1))
+        line = code.count("\n", 0, match.start(1 if match.group(1) else 2)) + 1
+        public = match.group(2) and match.group(2).startswith("tarnkit/")
+        yield line, "client/include/" + match.group(2) if public else match.group(1) or match.group(2), \
+            bool(public or match.group(1))
 
 
 def check(tree):

@@ -1,0 +1,102 @@
+#include "client/TarnReportingClient.h"
+
+#include <utility>
+
+#include "client/tarnkit/Values.h"
+
+#include <tarnkit/TarnReportingClient.h>
+
+namespace tarnkit {
+
+namespace {
+
+tarn::client::ReplyHandler unpacking(ReplyHandler handler) {
+  if (!handler) {
+    return {};
+  }
+  return [handler = std::move(handler)](tarn::client::Reply&& reply) {
+    handler(tarn::client::unpacked(std::move(reply)));
+  };
+}
+
+}  // namespace
+
+TarnReportingClient::Connected TarnReportingClient::connect(const std::string& path, const Options& options) {
+  auto inner = tarn::client::TarnReportingClient::connect(path, options);
+  Connected connected;
+  connected.errorNumber = inner.errorNumber;
+  connected.error = std::move(inner.error);
+  if (inner.client) {
+    connected.client = std::make_unique<TarnReportingClient>(std::move(inner.client));
+  }
+  return connected;
+}
+
+TarnReportingClient::TarnReportingClient(std::unique_ptr<tarn::client::TarnReportingClient> client)
+    : client_(std::move(client)) {}
+
+TarnReportingClient::~TarnReportingClient() = default;
+
+void TarnReportingClient::setLostHandler(LostHandler handler) {
+  client_->setLostHandler(std::move(handler));
+}
+
+Reply TarnReportingClient::call(const Request& request, std::optional<Milliseconds> timeout) {
+  return tarn::client::unpacked(client_->call(request.content(), timeout));
+}
+
+SendStatus TarnReportingClient::send(const Request& request, ReplyHandler handler) {
+  return client_->send(request.content(), unpacking(std::move(handler)));
+}
+
+SendStatus TarnReportingClient::trySend(const Request& request, ReplyHandler handler) {
+  return client_->trySend(request.content(), unpacking(std::move(handler)));
+}
+
+std::future<Reply> TarnReportingClient::sendForFuture(const Request& request) {
+  auto promise = std::make_shared<std::promise<Reply>>();
+  std::future<Reply> future = promise->get_future();
+  const SendStatus status = send(request, [promise](Reply&& reply) { promise->set_value(std::move(reply)); });
+  if (status != SendStatus::Sent) {
+    promise->set_value(tarn::client::unpacked(tarn::client::notSent(status)));
+  }
+  return future;
+}
+
+bool TarnReportingClient::flush() {
+  return client_->flush();
+}
+
+std::size_t TarnReportingClient::dispatch() {
+  return client_->dispatch();
+}
+
+std::size_t TarnReportingClient::wait(Milliseconds timeout) {
+  return client_->wait(timeout);
+}
+
+int TarnReportingClient::fd() const noexcept {
+  return client_->fd();
+}
+
+bool TarnReportingClient::wantsToWrite() const noexcept {
+  return client_->wantsToWrite();
+}
+
+bool TarnReportingClient::connected() const noexcept {
+  return client_->connected();
+}
+
+std::size_t TarnReportingClient::outstanding() const noexcept {
+  return client_->outstanding();
+}
+
+std::uint64_t TarnReportingClient::unmatchedReplies() const noexcept {
+  return client_->unmatchedReplies();
+}
+
+void TarnReportingClient::close() {
+  client_->close();
+}
+
+}  // namespace tarnkit
