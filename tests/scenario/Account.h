@@ -1,17 +1,18 @@
-// Account: the readable story of what arrived: for each back-end what it got, for each session what became of it.
+// Account: what a newcomer wants to know of a pass, and the details for who looks for one.
 #pragma once
 
 #include <string>
 #include <vector>
 
-#include "tests/scenario/Model.h"
+#include "tests/scenario/Expectations.h"
 #include "tests/scenario/Recorded.h"
 
 namespace tarn::scenario {
 
-// Both print to stdout. A table of back-ends with one event of each, and the names that each got:
-void printBackends(const std::vector<RecordedEvent>& events);
-// For each application the order of its messages, what was derived from them and the summaries:
-void printSessions(const std::vector<Expectation>& expectations, const std::vector<RecordedEvent>& events);
+// Two lines to stdout: "summary", and how many events each back-end got.
+void printAccount(const std::string& summary, const std::vector<RecordedEvent>& events);
+// Adds to the file at `path` the differences, and each event with the line that it matched. Throws std::runtime_error.
+void writeDetails(const std::string& path, const std::string& summary, const std::vector<std::string>& differences,
+                  const std::vector<RecordedEvent>& events, const std::vector<const ExpectedEvent*>& matches);
 
 }  // namespace tarn::scenario

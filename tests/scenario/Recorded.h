@@ -1,4 +1,4 @@
-// Recorded: what the service says about itself and what its recorder holds.
+// Recorded: what the service says about itself, what its recorder holds and the files that it leaves for people.
 #pragma once
 
 #include <cstdint>
@@ -13,17 +13,26 @@ namespace tarn::scenario {
 
 using nlohmann::json;
 
+// The stand-ins for back-ends of what no recorder holds:
+constexpr const char* kSummaryFiles = "file";  // an event for each file: the payload is its content
+constexpr const char* kReplies = "client";     // an event for each reply that a script got, named for its line
+
 struct RecordedEvent {
   std::int64_t id = 0;
-  double time = 0;
   std::string backend;
   std::string name;
   json payload;
-  json detail;
+  json detail = json::object();
+  std::string script{};  // that led to it; empty when that isn't known
 };
 
-// All events of the recorder, in the order of hand-over. Throws std::runtime_error.
-std::vector<RecordedEvent> recordedEvents(const std::string& stateDirectory);
+// All events of the recorder behind number `after`, in the order of hand-over. Throws std::runtime_error.
+std::vector<RecordedEvent> recordedEvents(const std::string& stateDirectory, std::int64_t after = 0);
+// The summary files below the service's state directory; those of one session are in the order of its stops. Time and
+// number aren't in the name; that of a file that is not named as it must be is left as it is.
+std::vector<RecordedEvent> summaryFiles(const std::string& stateDirectory);
+// What the client that played `script` printed, in the order of the lines: a reply may be held for long.
+std::vector<RecordedEvent> repliesTo(const std::string& script, const std::string& outputPath);
 
 // The service that is watched, over one connection that stays open meanwhile: an end of it would be recorded too.
 // Throws std::runtime_error when the service doesn't answer as it should. Threads: one.

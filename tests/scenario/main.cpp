@@ -1,25 +1,17 @@
-// tarnreportingscenario: plays scripts against a fresh service through client processes of their own, tells what each
-// back-end received and checks it against what the scripts must lead to. Exit status 0 only when all of it arrived.
-#include <unistd.h>
-
+// tarnreportingscenario: plays scripts against a fresh service through client processes of their own and compares what
+// arrived with what stands beside the scripts. Exit status 0 only when all of it arrived, in order, and nothing else.
 #include <CLI/CLI.hpp>
+#include <algorithm>
 #include <chrono>
 #include <cstdio>
 #include <cstdlib>
-#include <filesystem>
-#include <fstream>
 #include <iostream>
-#include <set>
 #include <stdexcept>
 
 #include "tests/scenario/Account.h"
-#include "tests/scenario/BackEnds.h"
 #include "tests/scenario/Comparison.h"
-#include "tests/scenario/Mirrors.h"
-#include "tests/scenario/Model.h"
-#include "tests/scenario/Recorded.h"
-#include "tests/scenario/ScriptProcess.h"
-#include "tests/scenario/SummaryFiles.h"
+#include "tests/scenario/ScriptPlayer.h"
+#include "tests/scenario/Update.h"
 
 namespace tarn::scenario {
 
@@ -28,115 +20,37 @@ namespace {
 constexpr double kPatienceSeconds = 30;
 // Some back-ends get their events from queues of their own, after the clients have gone.
 constexpr double kLateEventsSeconds = 5;
+constexpr double kSettlingSeconds = 2;
 constexpr int kWrongUsage = 64;
 
 struct Options {
   Service service;
   std::vector<std::string> together;
   std::vector<std::string> then;
-  bool internalBuild = false;
+  std::string directory;
+  std::string title = "scenario";
+  std::string details;
+  bool update = false;
 };
 
 double epochSeconds() {
   return std::chrono::duration<double>(std::chrono::system_clock::now().time_since_epoch()).count();
 }
 
-// A directory that goes with its owner.
-class TemporaryDirectory {
- public:
-  TemporaryDirectory() {
-    std::string name = (std::filesystem::temp_directory_path() / "tarnscenario.XXXXXX").string();
-    if (::mkdtemp(name.data()) == nullptr) {
-      throw std::runtime_error("can't make a temporary directory");
-    }
-    path_ = name;
-  }
-  ~TemporaryDirectory() {
-    std::error_code ignored;
-    std::filesystem::remove_all(path_, ignored);
-  }
-  TemporaryDirectory(const TemporaryDirectory&) = delete;
-  TemporaryDirectory& operator=(const TemporaryDirectory&) = delete;
-  const std::string& path() const { return path_; }
-
- private:
-  std::string path_;
-};
-
-std::string contentOf(const std::string& path) {
-  std::ifstream file(path);
-  return {std::istreambuf_iterator<char>(file), {}};
+std::vector<std::string> scriptsOf(const Options& options) {
+  std::vector<std::string> scripts = options.together;
+  scripts.insert(scripts.end(), options.then.begin(), options.then.end());
+  return scripts;
 }
 
-std::vector<json> jsonLines(const std::string& path) {
-  std::vector<json> lines;
-  std::ifstream file(path);
-  for (std::string text; std::getline(file, text);) {
-    lines.push_back(json::parse(text));
-  }
-  return lines;
+template <class Item>
+void append(std::vector<Item>& items, const std::vector<Item>& more) {
+  items.insert(items.end(), more.begin(), more.end());
 }
 
-// Starts all of them, then waits for all. Whether every one succeeded.
-bool play(const std::vector<std::string>& scripts, const Service& service, const std::string& directory) {
-  std::vector<ScriptProcess> processes;
-  processes.reserve(scripts.size());
-  for (const std::string& script : scripts) {
-    processes.emplace_back(service, script, directory);
-  }
-  bool succeeded = true;
-  for (ScriptProcess& process : processes) {
-    const int status = process.wait();
-    if (status != 0) {
-      succeeded = false;
-      std::fprintf(stderr, "scenario: %s ended with status %d: %s\n", process.script().c_str(), status,
-                   contentOf(process.complaintsPath()).c_str());
-    }
-  }
-  return succeeded;
-}
-
-std::vector<Expectation> expectationsOf(const Options& options) {
-  std::vector<Expectation> expectations;
-  for (const std::string& script : options.together) {
-    expectations.push_back(expectationOf(script, {options.together.size() == 1, options.internalBuild}));
-  }
-  for (const std::string& script : options.then) {
-    expectations.push_back(expectationOf(script, {true, options.internalBuild}));
-  }
-  // A message goes to every client's session of an ID.
-  std::set<std::int64_t> known;
-  for (const Expectation& expectation : expectations) {
-    for (const std::int64_t id : expectation.reporterIDs) {
-      if (!known.insert(id).second) {
-        throw std::runtime_error(expectation.script + ": another script has a session " + std::to_string(id) + " too");
-      }
-    }
-  }
-  return expectations;
-}
-
-std::vector<BackEndLine> backEndLinesOf(const Options& options) {
-  std::vector<BackEndLine> lines;
-  for (const auto* scripts : {&options.together, &options.then}) {
-    for (const std::string& script : *scripts) {
-      const auto more = backEndLines(script);
-      lines.insert(lines.end(), more.begin(), more.end());
-    }
-  }
-  return lines;
-}
-
-// Those that follow from the scripts themselves, with one of each connection's end.
-std::size_t expectedEvents(const std::vector<Expectation>& expectations) {
-  std::size_t count = mirrorEvents(expectations);
-  for (const Expectation& expectation : expectations) {
-    count += expectation.connections.size();
-    for (const auto& [application, events] : expectation.events) {
-      count += events.size();
-    }
-  }
-  return count;
+// By the recorder, as replies and files aren't.
+bool isRecorded(const ExpectedEvent& event) {
+  return event.backend != kReplies && event.backend != kSummaryFiles;
 }
 
 void printDifferences(const std::vector<std::string>& differences) {
@@ -149,60 +63,82 @@ void printDifferences(const std::vector<std::string>& differences) {
   }
 }
 
-int conclude(const std::vector<std::string>& differences, bool played, std::size_t matched, std::size_t events,
-             const Circumstances& circumstances) {
-  printDifferences(differences);
-  const double seconds = circumstances.endedAt - circumstances.startedAt;
-  if (!played || !differences.empty()) {
-    std::printf("scenario: NOT all of it arrived: %zu differences, %zu of %zu events in their places, %.1f s\n",
-                differences.size(), matched, events, seconds);
-    return EXIT_FAILURE;
-  }
-  std::printf("scenario: all of it arrived, in order, and nothing else: %zu events in %.1f s\n", events, seconds);
-  return EXIT_SUCCESS;
+std::string summaryOf(const Options& options, bool succeeded, std::size_t differences, std::size_t events,
+                      const Playing& playing) {
+  char seconds[32];
+  std::snprintf(seconds, sizeof seconds, "%.1f", playing.endedAt - playing.startedAt);
+  const std::size_t clients = scriptsOf(options).size();
+  return options.title + ": " + std::to_string(clients) + (clients == 1 ? " client, " : " clients, ") +
+         std::to_string(events) + " events in " + seconds + " s, " +
+         (succeeded ? "each as expected" : "NOT as expected: " + std::to_string(differences) + " differences");
 }
 
-int run(const Options& options) {
-  const TemporaryDirectory directory;
-  const std::vector<Expectation> expectations = expectationsOf(options);
-  BackEndComparison backEnds(backEndLinesOf(options));
+int check(const Options& options) {
+  std::vector<ExpectedEvent> expected;
+  std::size_t messages = 0;
+  ScriptPlayer player(options.service, options.directory);
+  for (const std::string& script : scriptsOf(options)) {
+    append(expected, readExpectations(script));
+    messages += player.messagesOf(script);
+  }
   ServiceWatch service(options.service.socket, kPatienceSeconds);
-  Circumstances circumstances;
-  circumstances.clientProcessName = std::filesystem::path(options.service.ctl).filename().string();
-  circumstances.startedAt = epochSeconds();
-  std::printf("scenario: %zu clients at once, then %zu alone%s\n", options.together.size(), options.then.size(),
-              options.internalBuild ? ", on an internal build" : "");
-  bool played = play(options.together, options.service, directory.path());
+  Playing playing{epochSeconds(), 0};
+  bool succeeded = player.play(options.together);
   for (const std::string& script : options.then) {
     service.ledgerAtRest(kPatienceSeconds);
-    played = play({script}, options.service, directory.path()) && played;
+    succeeded = player.play({script}) && succeeded;
   }
   service.ledgerAtRest(kPatienceSeconds);
-  const json ledger = service.ledgerAtRest(kLateEventsSeconds, expectedEvents(expectations) + backEnds.expected());
-  circumstances.endedAt = epochSeconds();
-  const std::vector<RecordedEvent> events = recordedEvents(options.service.stateDirectory);
-  SummaryFiles files(options.service.stateDirectory);
-  printBackends(events);
-  printSessions(expectations, events);
-  MirrorComparison mirrors(expectations, PayloadRules(circumstances), options.internalBuild);
-  mirrors.compare(events);
-  mirrors.print();
-  files.print();
+  const auto awaited = std::count_if(expected.begin(), expected.end(), isRecorded);
+  const json ledger = service.ledgerAtRest(kLateEventsSeconds, static_cast<std::size_t>(awaited));
+  playing.endedAt = epochSeconds();
 
-  Comparison comparison(expectations, circumstances);
-  comparison.compareEvents(events);
-  comparison.compareLedger(ledger, events.size());
-  for (const Expectation& expectation : expectations) {
-    comparison.compareReplies(expectation, jsonLines(directory.path() + "/" + expectation.script + ".replies"));
+  std::vector<RecordedEvent> events = recordedEvents(options.service.stateDirectory);
+  const std::size_t recorded = events.size();
+  append(events, summaryFiles(options.service.stateDirectory));
+  for (const std::string& script : scriptsOf(options)) append(events, player.replies(script));
+  events = withoutDirectory(std::move(events), options.directory);
+  Comparison comparison(expected, playing);
+  comparison.compare(events);
+  comparison.compareLedger(ledger, messages, recorded);
+  const auto& differences = comparison.differences();
+  succeeded = succeeded && differences.empty();
+  const std::string summary = summaryOf(options, succeeded, differences.size(), recorded, playing);
+  if (!options.details.empty()) writeDetails(options.details, summary, differences, events, comparison.matches());
+  printDifferences(differences);
+  printAccount(summary, events);
+  return succeeded ? EXIT_SUCCESS : EXIT_FAILURE;
+}
+
+// Plays the scripts one after the other, so that all that arrives meanwhile is the script's.
+int update(const Options& options) {
+  ScriptPlayer player(options.service, options.directory);
+  ServiceWatch service(options.service.socket, kPatienceSeconds);
+  std::int64_t lastEvent = 0;
+  std::vector<RecordedEvent> earlierFiles;
+  bool succeeded = true;
+  for (const std::string& script : scriptsOf(options)) {
+    Playing playing{epochSeconds(), 0};
+    succeeded = player.play({script}) && succeeded;
+    service.ledgerAtRest(kPatienceSeconds);
+    service.ledgerAtRest(kSettlingSeconds, SIZE_MAX);
+    playing.endedAt = epochSeconds();
+    std::vector<RecordedEvent> events = recordedEvents(options.service.stateDirectory, lastEvent);
+    lastEvent = events.empty() ? lastEvent : events.back().id;
+    const auto files = summaryFiles(options.service.stateDirectory);
+    std::copy_if(files.begin(), files.end(), std::back_inserter(events), [&](const RecordedEvent& file) {
+      return std::none_of(earlierFiles.begin(), earlierFiles.end(), [&](const RecordedEvent& earlier) {
+        return earlier.name == file.name && earlier.payload == file.payload;
+      });
+    });
+    earlierFiles = files;
+    for (RecordedEvent& event : events) event.script = fileName(script);
+    append(events, player.replies(script));
+    events = withoutDirectory(std::move(events), options.directory);
+    writeExpectations(script, updated(readExpectations(script), events, playing));
+    std::printf("%s: %zu events\n", fileName(expectationFile(script)).c_str(), events.size());
   }
-  backEnds.compare(events);
-  files.compare(expectations, events);
-  std::vector<std::string> differences = comparison.differences();
-  for (const auto* more : {&mirrors.differences(), &backEnds.differences(), &files.differences()}) {
-    differences.insert(differences.end(), more->begin(), more->end());
-  }
-  return conclude(differences, played, comparison.matched() + mirrors.matched() + backEnds.matched(), events.size(),
-                  circumstances);
+  return succeeded ? EXIT_SUCCESS : EXIT_FAILURE;
 }
 
 }  // namespace
@@ -210,7 +146,7 @@ int run(const Options& options) {
 }  // namespace tarn::scenario
 
 int main(int argc, char** argv) {
-  CLI::App app("Plays scripts against a fresh service and checks what its recorder received.", "tarnreportingscenario");
+  CLI::App app("Plays scripts against a fresh service and checks what arrived.", "tarnreportingscenario");
   tarn::scenario::Options options;
   app.add_option("--ctl", options.service.ctl, "The tarnreportingctl that plays the scripts")->required();
   app.add_option("--socket", options.service.socket, "The service's socket")->required();
@@ -218,11 +154,14 @@ int main(int argc, char** argv) {
   app.add_option("--then", options.then, "Scripts to play after the others, each alone")
       ->allow_extra_args(false)
       ->type_name("SCRIPT");
-  app.add_flag("--internal-build", options.internalBuild, "The service's device properties say so");
+  app.add_option("--directory", options.directory, "What @DIRECTORY@ in scripts stands for");
+  app.add_option("--title", options.title, "How the account calls it");
+  app.add_option("--details", options.details, "A file to add each event to, with the line that it matched");
+  app.add_flag("--update", options.update, "Write what arrived beside the scripts instead, each played alone");
   app.add_option("SCRIPT", options.together, "Scripts to play at once, each in a process of its own")->required();
   try {
     app.parse(argc, argv);
-    return tarn::scenario::run(options);
+    return options.update ? tarn::scenario::update(options) : tarn::scenario::check(options);
   } catch (const CLI::ParseError& error) {
     return app.exit(error) == 0 ? EXIT_SUCCESS : tarn::scenario::kWrongUsage;
   } catch (const std::exception& trouble) {
