@@ -27,6 +27,7 @@ ROWS = [
     ("processor time a message, old ones expiring", ("",)),
     ("decoding a message, to views", ("bare walk",)),
     ("decoding a request, to a finished dictionary", ("bare walk", "nlohmann")),
+    ("encoding a message", ("",)),
     ("resident bytes a logged message", ("map of variants", "its CBOR")),
     ("equality of two messages, equal but for the time", ("map of variants",)),
     ("equality of two messages, unequal", ("map of variants",)),

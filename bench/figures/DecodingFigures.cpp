@@ -1,5 +1,5 @@
 // What it costs to decode and check one message, beside a walk that only reads heads and lengths, and beside two
-// libraries.
+// libraries; and to encode it.
 #include <nlohmann/json.hpp>
 #include <span>
 #ifdef TARN_HAVE_LIBCBOR
@@ -10,6 +10,7 @@
 #include "bench/Message.h"
 #include "bench/ViewSink.h"
 #include "bench/figures/Figures.h"
+#include "wire/Encoder.h"
 #include "wire/RequestDecoder.h"
 
 namespace tarn::bench {
@@ -45,6 +46,15 @@ double toRequest(std::size_t count, const std::string& frame) {
   return nanosecondsEach(count, [&](std::size_t) {
     mustHold(decoder.decode(bytes, request, refusal) == wire::DecodeOutcome::Ok);
     keep(&request);
+  });
+}
+
+double encoded(std::size_t count, const plist::Dictionary& message) {
+  std::string out;
+  return nanosecondsEach(count, [&](std::size_t) {
+    out.clear();
+    wire::appendValue(out, message);
+    keep(out.data());
   });
 }
 
@@ -100,9 +110,11 @@ void measureDecoding(const Settings& settings, Table& table) {
 #endif
   Samples views;
   Samples dictionaries;
+  Samples encodings;
   for (int round = 0; round < settings.rounds; ++round) {
     views.push_back(toViews(count, message));
     dictionaries.push_back(toRequest(count, frame));
+    encodings.push_back(encoded(count, makeMessage(1)));
     for (Peer& peer : peers) {
       peer.samples.push_back(peer.measure(count, message));
     }
@@ -121,6 +133,7 @@ void measureDecoding(const Settings& settings, Table& table) {
   for (std::size_t i = 1; i < peers.size(); ++i) {
     table.add(row(name, median(dictionaries), peers[i]));
   }
+  table.add({"encoding a message", nanoseconds(median(encodings)), "", "", "", {}});
 }
 
 }  // namespace tarn::bench
