@@ -42,7 +42,8 @@ ROOMS = {
     "host/settings": GROUND,
     "host/machine": GROUND + ("wire",),
     "host/drivers": GROUND,
-    "host/traces/analysis": (),
+    # Loaded by the service and linked to nothing of it: the facility's interface is all that it knows.
+    "host/traces/analysis": BASE,
     "host/traces": GROUND + ("host/traces/analysis", "wire"),
     "recorder/store": BASE,
     "recorder": BASE + ("service/vocabulary", "recorder/store"),

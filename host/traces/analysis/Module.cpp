@@ -1,5 +1,4 @@
-// The entry points of the trace-analysis library (see TraceAnalysisAbi.h).
-#include <algorithm>
+// The trace-analysis library: the facility on top of the trace reader and the probes.
 #include <exception>
 #include <memory>
 #include <string>
@@ -7,154 +6,109 @@
 
 #include "host/traces/analysis/ChromeTrace.h"
 #include "host/traces/analysis/Probes.h"
-#include "host/traces/analysis/TraceAnalysisAbi.h"
+#include "host/traces/analysis/TraceAnalysisFactory.h"
 
-using tarn::trace_analysis::ChromeTrace;
-using tarn::trace_analysis::Interval;
-using tarn::trace_analysis::Probe;
-
-struct SkeinTrace {
-  ChromeTrace content;
-};
-
-struct SkeinSignpostData {
-  const ChromeTrace& content;
-};
-
-struct SkeinProbe {
-  const Probe& probe;
-  const ChromeTrace& content;
-  std::vector<SkeinProbe> children;
-};
-
-struct SkeinProbeList {
-  std::vector<Probe> content;
-  std::vector<SkeinProbe> probes;
-};
+namespace tarn::trace_analysis {
 
 namespace {
 
+using platform::Outcome;
+using platform::PlatformError;
+using platform::SignpostInterval;
+using platform::TraceProbe;
+
 constexpr double kSecondsPerTick = 1e-9;
 
-std::string_view viewOf(SkeinText text) {
-  return {text.bytes, text.size};
-}
-
-SkeinText textOf(std::string_view text) {
-  return {text.data(), text.size()};
-}
-
-void fail(SkeinFailure* failure, std::int64_t code, std::string_view text) noexcept {
-  failure->code = code;
-  const std::size_t size = std::min(text.size(), sizeof failure->text - 1);
-  std::copy_n(text.data(), size, failure->text);
-  failure->text[size] = '\0';
-}
-
-// What `make` gives, or null and why.
-template <class Make>
-auto guarded(SkeinFailure* failure, const Make& make) noexcept -> decltype(make()) {
-  try {
-    return make();
-  } catch (const std::exception& error) {
-    fail(failure, 0, error.what());
-    return nullptr;
-  }
-}
-
-SkeinInterval intervalAt(const ChromeTrace& trace, std::size_t index) {
+SignpostInterval intervalAt(const ChromeTrace& trace, std::size_t index) {
   const Interval& interval = trace.intervals[index];
-  return {textOf(trace.texts[interval.subsystem]), textOf(trace.texts[interval.name]), interval.duration};
+  return {trace.texts[interval.subsystem], trace.texts[interval.name],
+          static_cast<double>(interval.duration) * kSecondsPerTick};
 }
 
-std::vector<SkeinProbe> wrap(const std::vector<Probe>& probes, const ChromeTrace& trace) {
-  std::vector<SkeinProbe> wrapped;
-  wrapped.reserve(probes.size());
-  for (const Probe& probe : probes) {
-    wrapped.push_back({probe, trace, wrap(probe.children, trace)});
+// An opened trace and all its intervals.
+class Model final : public platform::TraceModel {
+ public:
+  explicit Model(ChromeTrace trace) : trace_(std::move(trace)) {}
+
+  Outcome<std::vector<SignpostInterval>> allSignpostIntervals() override {
+    try {
+      std::vector<SignpostInterval> intervals;
+      intervals.reserve(trace_.intervals.size());
+      for (std::size_t i = 0; i < trace_.intervals.size(); ++i) intervals.push_back(intervalAt(trace_, i));
+      return {std::move(intervals), {}};
+    } catch (const std::exception& error) {
+      return {{}, PlatformError{0, error.what()}};
+    }
   }
-  return wrapped;
+
+  const ChromeTrace& trace() const { return trace_; }
+
+ private:
+  const ChromeTrace trace_;
+};
+
+std::vector<TraceProbe> madeOf(const std::vector<Probe>& probes, const ChromeTrace& trace) {
+  std::vector<TraceProbe> made;
+  for (const Probe& probe : probes) {
+    const char* const kind = probe.measuresIntervals ? "SkeinSignpostIntervalProbe" : "SkeinProbe";
+    TraceProbe& one = made.emplace_back();
+    one = {probe.name, kind, probe.measuresIntervals, {}, madeOf(probe.children, trace)};
+    one.events.reserve(probe.events.size());
+    for (const std::uint32_t event : probe.events) one.events.push_back(intervalAt(trace, event));
+  }
+  return made;
 }
 
-template <class T>
-void destroy(T* object) {
-  const std::unique_ptr<T> owned(object);
-}
+class Library final : public platform::TraceAnalysisLibrary {
+ public:
+  explicit Library(Host host) : host_(std::move(host)) {}
 
-constexpr SkeinTraceModelV1 kTraceModel{
-    sizeof(SkeinTraceModelV1),
-    [](SkeinText location, SkeinFailure* failure) {
-      return guarded(failure, [&]() -> SkeinTrace* {
-        auto read = tarn::trace_analysis::readTrace(std::string(viewOf(location)));
-        if (!read.failure.empty()) {
-          fail(failure, read.code, read.failure);
-          return nullptr;
-        }
-        return std::make_unique<SkeinTrace>(SkeinTrace{std::move(read.trace)}).release();
-      });
-    },
-    [](SkeinTrace* trace) { destroy(trace); }};
+  Outcome<std::shared_ptr<platform::TraceModel>> openTrace(std::string_view location) override {
+    try {
+      auto read = readTrace(std::string(location));
+      if (!read.failure.empty()) return {nullptr, PlatformError{read.code, std::move(read.failure)}};
+      return {std::make_shared<Model>(std::move(read.trace)), {}};
+    } catch (const std::exception& error) {
+      return {nullptr, PlatformError{0, error.what()}};
+    }
+  }
 
-constexpr SkeinSignpostDataModelV1 kSignpostDataModel{
-    sizeof(SkeinSignpostDataModelV1),
-    [](const SkeinTrace* trace, SkeinFailure* failure) {
-      return guarded(failure,
-                     [&] { return std::make_unique<SkeinSignpostData>(SkeinSignpostData{trace->content}).release(); });
-    },
-    [](SkeinSignpostData* data) { destroy(data); },
-    [](const SkeinSignpostData* data) { return std::uint64_t{data->content.intervals.size()}; },
-    [](const SkeinSignpostData* data, std::uint64_t index) { return intervalAt(data->content, index); },
-    [](const SkeinSignpostData* /*data*/) { return kSecondsPerTick; }};
+  std::vector<TraceProbe> probesForDictionaries(const std::vector<plist::Dictionary>& descriptions,
+                                                platform::TraceModel& trace) override {
+    const auto* const model = dynamic_cast<const Model*>(&trace);
+    if (model == nullptr) return {};  // not one that this library opened
+    try {
+      const auto read = probesFor(host_.jsonOf(descriptions), model->trace());
+      if (read.failure.empty()) return madeOf(read.probes, model->trace());
+      host_.refuse(read.failure);
+    } catch (const std::exception& error) {
+      host_.refuse(error.what());
+    }
+    return {};
+  }
 
-constexpr SkeinSignpostPlistV1 kSignpostPlist{
-    sizeof(SkeinSignpostPlistV1),
-    [](SkeinText descriptions, const SkeinTrace* trace, SkeinFailure* failure) {
-      return guarded(failure, [&]() -> SkeinProbeList* {
-        auto read = tarn::trace_analysis::probesFor(viewOf(descriptions), trace->content);
-        if (!read.failure.empty()) {
-          fail(failure, 0, read.failure);
-          return nullptr;
-        }
-        auto list = std::make_unique<SkeinProbeList>(SkeinProbeList{std::move(read.probes), {}});
-        list->probes = wrap(list->content, trace->content);
-        return list.release();
-      });
-    },
-    [](SkeinProbeList* probes) { destroy(probes); },
-    [](const SkeinProbeList* probes) { return std::uint64_t{probes->probes.size()}; },
-    [](const SkeinProbeList* probes, std::uint64_t index) { return &probes->probes[index]; },
-    [](const SkeinProbe* probe) { return textOf(probe->probe.name); },
-    [](const SkeinProbe* probe) {
-      return textOf(probe->probe.measuresIntervals ? "SkeinSignpostIntervalProbe" : "SkeinProbe");
-    },
-    [](const SkeinProbe* probe) { return std::uint64_t{probe->children.size()}; },
-    [](const SkeinProbe* probe, std::uint64_t index) { return &probe->children[index]; }};
+ private:
+  const Host host_;
+};
 
-constexpr SkeinSignpostIntervalProbeV1 kSignpostIntervalProbe{
-    sizeof(SkeinSignpostIntervalProbeV1),
-    [](const SkeinProbe* probe) { return std::int32_t{probe->probe.measuresIntervals ? 1 : 0}; },
-    [](const SkeinProbe* probe) { return std::uint64_t{probe->probe.events.size()}; },
-    [](const SkeinProbe* probe, std::uint64_t index) {
-      return intervalAt(probe->content, probe->probe.events[index]);
-    }};
+class Analysis final : public platform::TraceAnalysis {
+ public:
+  explicit Analysis(const Host& host) : library_(std::make_shared<Library>(host)) {}
+  Loaded load() override { return {library_, {}}; }
+
+ private:
+  const std::shared_ptr<Library> library_;
+};
 
 }  // namespace
 
-// The names say which class and version: NOLINTBEGIN(readability-identifier-naming)
-extern "C" {
+}  // namespace tarn::trace_analysis
 
-[[gnu::visibility("default")]] const SkeinTraceModelV1* SkeinTraceModel_V1() {
-  return &kTraceModel;
+extern "C" [[gnu::visibility("default")]] tarn::platform::TraceAnalysis* tarnCreateTraceAnalysis(
+    const tarn::trace_analysis::Host& host) {
+  try {
+    return std::make_unique<tarn::trace_analysis::Analysis>(host).release();
+  } catch (const std::exception&) {
+    return nullptr;
+  }
 }
-[[gnu::visibility("default")]] const SkeinSignpostDataModelV1* SkeinSignpostDataModel_V1() {
-  return &kSignpostDataModel;
-}
-[[gnu::visibility("default")]] const SkeinSignpostPlistV1* SkeinSignpostPlist_V1() {
-  return &kSignpostPlist;
-}
-[[gnu::visibility("default")]] const SkeinSignpostIntervalProbeV1* SkeinSignpostIntervalProbe_V1() {
-  return &kSignpostIntervalProbe;
-}
-
-}  // extern "C"
-// NOLINTEND(readability-identifier-naming)

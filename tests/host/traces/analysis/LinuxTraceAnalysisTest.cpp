@@ -124,8 +124,17 @@ TEST_F(TraceAnalysis, TheFirstClassThatALibraryLacksIsTold) {
   EXPECT_TRUE(log_.contains(LogLevel::Error, " lacks a class: SkeinSignpostPlist"));
 }
 
-TEST_F(TraceAnalysis, ATableOfAnotherSizeIsAClassThatIsMissing) {
-  EXPECT_EQ(missing(TARN_TRACE_ANALYSIS_SHORT), "SkeinSignpostDataModel");
+TEST_F(TraceAnalysis, AnotherLibraryLacksEveryClass) {
+  EXPECT_EQ(missing("libm.so.6"), "SkeinTraceModel");
+  EXPECT_TRUE(log_.contains(LogLevel::Error, "the trace-analysis library libm.so.6 lacks a class: SkeinTraceModel"));
+}
+
+TEST_F(TraceAnalysis, ATraceOfAnotherLibraryHasNoProbes) {
+  class Stranger final : public platform::TraceModel {
+   public:
+    platform::Outcome<std::vector<platform::SignpostInterval>> allSignpostIntervals() override { return {}; }
+  } stranger;
+  EXPECT_TRUE(library()->probesForDictionaries({plist::Dictionary{{"name", "a"}}}, stranger).empty());
 }
 
 TEST_F(TraceAnalysis, TheDefaultLiesBesideTheProgram) {
