@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "plist/Dictionary.h"
+#include "plist/EscapedText.h"
 #include "plist/formats/Json.h"
 
 namespace tarn::plist {

@@ -4,6 +4,7 @@
 #include <sys/stat.h>
 
 #include <algorithm>
+#include <limits>
 #include <thread>
 #include <utility>
 
@@ -18,6 +19,13 @@ constexpr int kBusyMilliseconds = 2000;
 // The pace of looking for changes: quick behind a change, gentle when it stays quiet.
 constexpr std::chrono::milliseconds kFirstLook{10};
 constexpr std::chrono::milliseconds kLastLook{200};
+// What a read may cost, by the bytes of the file and its log. Rows of ours cost far less; a damaged or made-up file may
+// lead into itself and would otherwise never end, or say far more than it holds.
+constexpr int kStepsAtOnce = 1000;  // of SQLite's machine, between two looks at the bound
+constexpr std::int64_t kStepsPerByte = 64;
+constexpr std::int64_t kStepsOfSmallFile = 1'000'000;
+constexpr std::int64_t kTextPerByte = 4;
+constexpr std::int64_t kTextOfSmallFile = 65536;
 
 std::string_view valueText(sqlite3_value* value) noexcept {
   const void* const bytes = sqlite3_value_blob(value);
@@ -27,6 +35,21 @@ std::string_view valueText(sqlite3_value* value) noexcept {
 
 void matchesGlob(sqlite3_context* context, int, sqlite3_value** values) {
   sqlite3_result_int(context, globMatches(valueText(values[0]), valueText(values[1])) ? 1 : 0);
+}
+
+int spendSteps(void* stepsLeft) {
+  auto& left = *static_cast<std::int64_t*>(stepsLeft);
+  left -= kStepsAtOnce;
+  return left < 0 ? 1 : 0;
+}
+
+// Nothing that a file's schema says is carried out beyond reading its tables.
+void distrust(sqlite3* database, std::int64_t& stepsLeft) {
+  for (const int option :
+       {SQLITE_DBCONFIG_TRUSTED_SCHEMA, SQLITE_DBCONFIG_ENABLE_VIEW, SQLITE_DBCONFIG_ENABLE_TRIGGER}) {
+    sqlite3_db_config(database, option, 0, nullptr);
+  }
+  sqlite3_progress_handler(database, kStepsAtOnce, spendSteps, &stepsLeft);
 }
 
 // The file name as a "file:" URI, in which some characters would mean something.
@@ -87,14 +110,30 @@ bool EventReader::openAs(const std::string& name, std::string& error) {
     return false;
   }
   sqlite3_busy_timeout(connection_.handle(), kBusyMilliseconds);
+  distrust(connection_.handle(), stepsLeft_);
   sqlite3_create_function_v2(connection_.handle(), "matches_glob", 2, SQLITE_UTF8 | SQLITE_DETERMINISTIC, nullptr,
                              matchesGlob, nullptr, nullptr, nullptr);
   // Only the first reading access shows whether the log and its index can be used.
   if (!connection_.integer("SELECT count(*) FROM sqlite_schema")) {
-    error = connection_.errorText();
+    error = errorText();
     return false;
   }
   return true;
+}
+
+void EventReader::setBounds() {
+  std::int64_t bytes = 0;
+  for (const std::string& name : {file_.string(), file_.string() + "-wal"}) {
+    struct stat status {};
+    bytes += ::stat(name.c_str(), &status) == 0 ? std::int64_t{status.st_size} : 0;
+  }
+  bytes = std::min(bytes, std::numeric_limits<std::int64_t>::max() / (2 * kStepsPerByte));
+  stepsLeft_ = kStepsOfSmallFile + kStepsPerByte * bytes;
+  textLeft_ = kTextOfSmallFile + kTextPerByte * bytes;
+}
+
+std::string EventReader::errorText() const {
+  return stepsLeft_ < 0 ? "its tables lead into themselves" : connection_.errorText();
 }
 
 bool EventReader::open(std::string& error) {
@@ -121,6 +160,7 @@ EventReader::Result EventReader::read(const EventQuery& query) {
     return missing("there is no file " + file_.string());
   }
   if (connection_.isOpen() && !sameFile(now)) connection_.close();
+  setBounds();
   std::string error;
   if (!connection_.isOpen() && !open(error)) return failed(file_.string() + ": " + error);
   Result result = readOpen(query);
@@ -138,38 +178,50 @@ std::int64_t EventReader::startingPoint(std::int64_t after) {
 EventReader::Result EventReader::readOpen(const EventQuery& query) {
   Result result;
   dataVersion_ = connection_.integer("PRAGMA data_version").value_or(-1);
-  if (connection_.run("BEGIN") != SQLITE_OK) return failed(file_.string() + ": " + connection_.errorText());
+  if (connection_.run("BEGIN") != SQLITE_OK) return failed(file_.string() + ": " + errorText());
   std::int64_t after = query.after;
-  const auto tables = connection_.integer("SELECT count(*) FROM sqlite_schema WHERE name = 'events'");
+  const auto tables = connection_.integer(
+      "SELECT count(*) FROM sqlite_schema WHERE name = 'events' AND type = 'table' AND rootpage > 0");
   if (tables == 0) {
     static_cast<void>(connection_.run("ROLLBACK"));
     return missing(file_.string() + " holds no events yet");
   }
   after = startingPoint(after);
-  const bool ok = readRows(query, after, result);
-  std::string error = ok ? std::string() : connection_.errorText();
+  std::string error;
+  const bool ok = readRows(query, after, result, error);
   static_cast<void>(connection_.run("ROLLBACK"));
   if (!ok) return failed(file_.string() + ": " + error);
   lastRead_ = opened_;
   return result;
 }
 
-bool EventReader::readRows(const EventQuery& query, std::int64_t after, Result& result) {
+bool EventReader::readRows(const EventQuery& query, std::int64_t after, Result& result, std::string& error) {
   std::string sql = "SELECT id, time, backend, name, payload, detail FROM events WHERE id > ?1";
   if (query.backend) sql += " AND backend = ?2";
   if (query.nameGlob) sql += " AND matches_glob(?3, name)";
   sql += " ORDER BY id LIMIT ?4";
   Statement rows;
-  if (rows.prepare(connection_.handle(), sql) != SQLITE_OK) return false;
+  if (rows.prepare(connection_.handle(), sql) != SQLITE_OK) {
+    error = errorText();
+    return false;
+  }
   rows.bind(1, after).bind(4, static_cast<std::int64_t>(query.limit));
   if (query.backend) rows.bind(2, std::string_view(*query.backend));
   if (query.nameGlob) rows.bind(3, std::string_view(*query.nameGlob));
   int code = rows.step();
   for (; code == SQLITE_ROW; code = rows.step()) {
+    for (int column = 2; column < 6; ++column) textLeft_ -= static_cast<std::int64_t>(rows.text(column).size());
+    if (textLeft_ < 0) {
+      error = "its rows say more than it holds";
+      return false;
+    }
     result.rows.push_back({rows.integer(0), rows.real(1), std::string(rows.text(2)), std::string(rows.text(3)),
                            std::string(rows.text(4)), std::string(rows.text(5))});
   }
-  if (code != SQLITE_DONE) return false;
+  if (code != SQLITE_DONE) {
+    error = errorText();
+    return false;
+  }
   result.more = result.rows.size() == query.limit;
   const std::int64_t last = connection_.integer("SELECT max(id) FROM events").value_or(after);
   result.lookedUpTo = result.more && !result.rows.empty() ? result.rows.back().id : std::max(after, last);

@@ -2,7 +2,8 @@
 //
 // Owner: a tool. Opens the file read-only and keeps no transaction open between two calls. A file in a directory that
 // can't be written to is read as it lies there when nobody else has it open. When the file is set aside or replaced,
-// the reader goes on with the new one. Threads: one at a time.
+// the reader goes on with the new one. The file isn't trusted: whatever it holds, it stays as it is, and a read ends
+// with rows or an error after work that its bytes are worth. Threads: one at a time.
 #pragma once
 
 #include <chrono>
@@ -74,9 +75,11 @@ class EventReader {
   bool changed();
   bool open(std::string& error);
   bool openAs(const std::string& name, std::string& error);
+  void setBounds();  // of the read that begins
+  std::string errorText() const;
   std::int64_t startingPoint(std::int64_t after);
   Result readOpen(const EventQuery& query);
-  bool readRows(const EventQuery& query, std::int64_t after, Result& result);
+  bool readRows(const EventQuery& query, std::int64_t after, Result& result, std::string& error);
 
   const std::filesystem::path file_;
   Connection connection_;
@@ -84,6 +87,8 @@ class EventReader {
   bool asItLies_ = false;             // opened without locks and log
   std::optional<Identity> lastRead_;  // the file of the last rows, nothing before the first ones
   std::int64_t dataVersion_ = -1;
+  std::int64_t stepsLeft_ = 0;  // of SQLite's machine
+  std::int64_t textLeft_ = 0;   // bytes
 };
 
 }  // namespace tarn::recorder

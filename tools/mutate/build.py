@@ -145,8 +145,8 @@ class Builder:
                 return name
         return output
 
-    def link(self, program, objects, output):
-        """The test program as ninja links it, with these objects before its own."""
+    def link(self, program, objects, selector, output):
+        """The test program as ninja links it, with those of these objects (by source) that it holds before its own."""
         commands = subprocess.run(["ninja", "-C", self.build, "-t", "commands", program], check=True,
                                   capture_output=True, text=True).stdout.splitlines()
         made = re.compile(r" -o \S*\b" + re.escape(program) + r"(?:\s|$)")
@@ -157,9 +157,17 @@ class Builder:
         words[words.index("-o") + 1] = output
         words = [self.with_mutated_headers(word) if word.endswith(".o") else word for word in words]
         first = next(at for at, word in enumerate(words) if word.endswith(".o"))
-        words[first:first] = objects
+        held = self.members([word for word in words if word.endswith(".a")])
+        words[first:first] = [each for source, each in objects.items() if os.path.basename(source) + ".o" in held]
+        words.insert(first, selector)
         os.makedirs(os.path.dirname(output), exist_ok=True)
         self.must(words)
+
+    def members(self, archives):
+        within = [each for each in archives if not os.path.isabs(each)]
+        told = [subprocess.run(["ar", "t", each], cwd=self.build, check=True, capture_output=True, text=True).stdout
+                for each in within]
+        return set("".join(told).split())
 
     def must(self, words):
         done = subprocess.run(words, cwd=self.build, capture_output=True, text=True, check=False)

@@ -88,11 +88,11 @@ class Folder:
         self.builder.targets(self.programs)
         dropped = self.builder.mutated(self.files, self.sources, self.running, say)
         selector = self.builder.selector()
-        objects = [self.builder.object_of(each) for each in self.sources] + [selector]
+        objects = {each: self.builder.object_of(each) for each in self.sources}
         programs = []
         for name in self.programs:
             path = os.path.join(place, "bin", name)
-            self.builder.link(name, objects, path)
+            self.builder.link(name, objects, selector, path)
             programs.append(campaign.Program(path, folders.filter_of(name)))
             campaign.prepare(programs[-1], self.options.seed, place)
             say(f"{self.name}: {name} passes unchanged in {sum(programs[-1].milliseconds.values()) / 1000:.1f} s")
@@ -103,14 +103,14 @@ class Folder:
         with ThreadPoolExecutor(self.options.jobs) as pool:
             fates = list(zip(alive, pool.map(lambda each: race.fate(each, len(alive)), alive)))
         for mutant in self.built:
-            fate = self.build_and_run(mutant, objects, programs)
+            fate = self.build_and_run(mutant, objects, selector, programs)
             if fate is None:
                 self.dropped += 1
             else:
                 fates.append((mutant, fate))
         return fates
 
-    def build_and_run(self, mutant, objects, programs):
+    def build_and_run(self, mutant, objects, selector, programs):
         copy = os.path.join(self.builder.place, "built", os.path.basename(mutant.file))
         self.builder.write(copy, schemata.with_built(self.files[mutant.file], mutant))
         output = os.path.join(self.builder.place, "built", "one.o")
@@ -119,10 +119,9 @@ class Folder:
             return "caught"
         if wrong:
             return None
-        mine = [output if each == self.builder.object_of(mutant.file) else each for each in objects]
         for name, program in zip(self.programs, programs):
             path = os.path.join(self.builder.place, "built", name)
-            self.builder.link(name, mine, path)
+            self.builder.link(name, {**objects, mutant.file: output}, selector, path)
             seconds = 10 + 6 * sum(program.milliseconds.values()) / 1000
             if not campaign.run(path, program.filter, 0, seconds, self.options.seed)[0]:
                 return "caught"

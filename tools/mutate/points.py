@@ -27,6 +27,7 @@ PASSED_OVER = {Kind.STATIC_ASSERT, Kind.ENUM_DECL, Kind.CXX_UNARY_EXPR, Kind.TYP
 JUMPS = {Kind.BREAK_STMT, Kind.CONTINUE_STMT}
 INTEGER = re.compile(r"(0[xX][0-9a-fA-F']+|[0-9][0-9']*)([uUlLzZ]*)$")
 FLOATING = re.compile(r"([0-9']*\.?[0-9']*(?:[eE][+-]?[0-9]+)?)([fFlL]?)$")
+ASSIGNMENT = re.compile(r"[\w.:>\[\]-]+ = ")
 STATEMENT_CALL = re.compile(r"(?:(\w+)\s*(?:\.|->|\(|<))")
 
 
@@ -228,7 +229,7 @@ def is_action(cursor, text):
 def same_target(first, second):
     """Calls of two functions, or of one object: where order may matter."""
     one, other = STATEMENT_CALL.match(first), STATEMENT_CALL.match(second)
-    if not one or not other or first == second:
+    if not one or not other or first == second or (ASSIGNMENT.match(first) and ASSIGNMENT.match(second)):
         return False
     bare = one.group(0)[-1] == "(" and other.group(0)[-1] == "("
     return bare or one.group(1) == other.group(1)
