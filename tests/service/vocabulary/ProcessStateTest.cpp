@@ -6,10 +6,8 @@
 #include <thread>
 #include <vector>
 
-#include "platform/WorkQueue.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
-#include "service/vocabulary/TarnReportingUtility.h"
 #include "testing/FakePlatform.h"
 
 namespace tarn {
@@ -72,19 +70,6 @@ TEST_F(ProcessStateTest, AStateThatIsAskedForAtTheEndGoesToo) {
   static_cast<void>(ProcessState::of<Asking>());
   TarnReportingInstallFacilities(nullptr);
   EXPECT_EQ(gone(), (std::vector<std::string>{"first goes"}));
-}
-
-TEST_F(ProcessStateTest, WorkThatGoesWithTheServerQueueStillFindsItsState) {
-  ++ProcessState::of<First>()->count;
-  int found = 0;
-  struct AtTheEnd {
-    int& found;
-    ~AtTheEnd() { found = ProcessState::of<First>()->count; }
-  };
-  TarnReportingUtilityGetReportingServerQueue()->async([held = std::make_shared<AtTheEnd>(found)] {});
-  platform_.workQueues.dropAll();
-  TarnReportingInstallFacilities(nullptr);
-  EXPECT_EQ(found, 1);
 }
 
 TEST_F(ProcessStateTest, ManyThreadsGetTheOne) {
