@@ -27,8 +27,9 @@ TYPE = re.compile(r"\b(?:class|struct|union)\b")
 SMART = re.compile(r"\b(?:(?:shared|unique|weak)_ptr|make_(?:shared|unique))\s*<\s*(?!const\b)")
 NOISE = re.compile(r"\[\[.*?\]\]|\b(?:public|private|protected|default|case[^:;]*)\s*:(?!:)|->", re.DOTALL)
 NAME = re.compile(r"([A-Za-z_]\w*)\s*(?:\[[^\]]*\]\s*)*$")
-# What stands behind the closing brace of an initialiser or a lambda, and not of a block.
+# What stands after the closing brace of an initialiser or a lambda, and not of a block.
 CARRIES_ON = ";,)].(<>+-*/%&|^?!="
+FOLLOWING = re.compile(r"\s*(.?)")
 LITERAL = re.compile(r"\(\s*(?:[-\d\"']|(?:true|false|nullptr)\b)")
 
 
@@ -61,18 +62,18 @@ def statements(code):
             depth += 1 if char == "(" else -1
         elif char == "{":
             outer.append((scope, start, depth))
-            scope, start, depth = scope_behind(code[start:at], scope), at + 1, 0
+            scope, start, depth = scope_after(code[start:at], scope), at + 1, 0
         elif char == "}" and outer:
-            inner, (scope, begun, depth) = scope, outer.pop()
-            following = code[at + 1:].lstrip()[:1] if inner == "code" else ""
+            scope, begun, depth = outer.pop()
+            following = FOLLOWING.match(code, at + 1).group(1)
             start = begun if following and following in CARRIES_ON else at + 1
         elif char == ";" and depth == 0:
             yield start, at, scope
             start = at + 1
 
 
-def scope_behind(head, scope):
-    """The scope that the brace behind this text opens."""
+def scope_after(head, scope):
+    """The scope that a brace after this text opens."""
     head = without_templates(head)
     if re.search(r"\benum\b", head):
         return "enum"
