@@ -9,6 +9,7 @@
 #include "platform/Facilities.h"
 #include "platform/NotificationCenter.h"
 #include "plist/Value.h"
+#include "service/vocabulary/ProcessState.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
 
@@ -39,20 +40,30 @@ constexpr std::array<Feature, 3> kFeatures{{
     {"ringerstate", {}, "sys.oxbow.homeshell.ringerstate"},
 }};
 
-// The shared instance and the lock on it.
+// The shared instance and the lock on it. Whatever ends it, its registrations end with it.
 struct Shared {
+  Shared() = default;
+  ~Shared() { clear(); }
+  Shared(const Shared&) = delete;
+  Shared& operator=(const Shared&) = delete;
+
+  void clear() {
+    std::shared_ptr<TarnReportingSystemMonitor> ended;  // dies after the lock
+    const std::lock_guard guard(lock);
+    if (instance != nullptr) {
+      instance->clear();
+      ended = std::move(instance);
+    }
+  }
+
   std::mutex lock;
-  std::shared_ptr<TarnReportingSystemMonitor> instance;
+  std::shared_ptr<TarnReportingSystemMonitor> instance;  // guarded by lock
 };
 
-Shared& shared() {
-  static Shared theOne;
-  return theOne;
-}
-
 std::shared_ptr<TarnReportingSystemMonitor> currentInstance() {
-  const std::lock_guard guard(shared().lock);
-  return shared().instance;
+  const auto shared = ProcessState::of<Shared>();
+  const std::lock_guard guard(shared->lock);
+  return shared->instance;
 }
 
 plist::Dictionary makeFeatures() {
@@ -91,9 +102,10 @@ bool sameState(const plist::Dictionary& a, const plist::Dictionary& b) {
 }  // namespace
 
 void TarnReportingSystemMonitor::initializeWithQueue(std::shared_ptr<platform::WorkQueue> queue) {
-  const std::lock_guard guard(shared().lock);
-  if (shared().instance == nullptr) {
-    shared().instance = initWithQueue(std::move(queue));
+  const auto shared = ProcessState::of<Shared>();
+  const std::lock_guard guard(shared->lock);
+  if (shared->instance == nullptr) {
+    shared->instance = initWithQueue(std::move(queue));
   }
 }
 
@@ -113,12 +125,7 @@ std::vector<plist::Key> TarnReportingSystemMonitor::getSystemMonitorKeys() {
 }
 
 void TarnReportingSystemMonitor::reset() {
-  std::shared_ptr<TarnReportingSystemMonitor> instance;  // dies behind the lock
-  const std::lock_guard guard(shared().lock);
-  if (shared().instance != nullptr) {
-    shared().instance->clear();
-    instance = std::move(shared().instance);
-  }
+  ProcessState::of<Shared>()->clear();
 }
 
 plist::Dictionary TarnReportingSystemMonitor::TarnReportingDefaults() {

@@ -1,7 +1,8 @@
 // TarnReportingSystemMonitor: a live picture of the few settings of the device that matter to audio analytics, and the
 // service's own defaults.
 //
-// One shared instance for the process: made when the service starts, with the server queue, and kept until reset().
+// One shared instance for the process: made when the service starts, with the server queue, and kept
+// until reset() or the end of the installation.
 // Each setting is read once at creation, and again whenever the notification of its change comes; then the shared
 // dictionary gets the new state and its observers are called.
 //

@@ -13,6 +13,7 @@
 #include "platform/GyreService.h"
 #include "platform/NotificationCenter.h"
 #include "plist/Value.h"
+#include "service/vocabulary/ProcessState.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
 #include "service/vocabulary/TarnReportingUtility.h"
@@ -36,11 +37,6 @@ struct RunTimeSettings {
   std::int32_t minimumIOCycle = 0;
   double waitMicroseconds = 0;
 };
-
-RunTimeSettings& runTimeSettings() {
-  static RunTimeSettings settings;
-  return settings;
-}
 
 template <class... Arguments>
 void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
@@ -111,7 +107,7 @@ std::unique_ptr<TarnReportingSessionDPWorker> TarnReportingSessionDPWorker::init
   }
   settings.minimumIOCycle = getRunTimeDefaults("io_cycle");
   settings.waitMicroseconds = getDoubleRunTimeDefaults("wait_time");
-  runTimeSettings() = settings;
+  *ProcessState::of<RunTimeSettings>() = settings;
   return std::make_unique<TarnReportingSessionDPWorker>(session);
 }
 
@@ -141,15 +137,15 @@ bool TarnReportingSessionDPWorker::interestedInMessage(const TarnReportingSessio
 }
 
 bool TarnReportingSessionDPWorker::meetsConditions(const plist::Dictionary& payload, double now) const {
-  const RunTimeSettings& settings = runTimeSettings();
-  return bufferFrameSize(payload) >= settings.minimumBufferFrameSize &&
+  const auto settings = ProcessState::of<RunTimeSettings>();
+  return bufferFrameSize(payload) >= settings->minimumBufferFrameSize &&
          (lastMessageTime_ == 0.0 || now - lastMessageTime_ > kSecondsBetweenRequests) &&
-         ioCycle(payload) >= settings.minimumIOCycle;
+         ioCycle(payload) >= settings->minimumIOCycle;
 }
 
 void TarnReportingSessionDPWorker::dropGyre(const plist::Dictionary& payload) {
   const platform::Facilities& facilities = TarnReportingFacilities();
-  waitFor(heldWait(runTimeSettings().waitMicroseconds));
+  waitFor(heldWait(ProcessState::of<RunTimeSettings>()->waitMicroseconds));
   log(LogLevel::Info, "Dropping gyre %@", payload);
   if (facilities.gyre != nullptr) {
     facilities.gyre->requestGyre({.subsystem = std::string(kSubsystem),

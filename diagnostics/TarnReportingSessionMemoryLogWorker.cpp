@@ -12,6 +12,7 @@
 #include "platform/Condition.h"
 #include "platform/Facilities.h"
 #include "platform/WorkQueue.h"
+#include "service/vocabulary/ProcessState.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
 #include "service/vocabulary/TarnReportingUtility.h"
@@ -52,11 +53,6 @@ struct Tool {
 constexpr Tool kResources{"/usr/local/bin/restop", "sys.oxbow.tarnkit.reporting.memorylog.resources", isResourceLine};
 constexpr Tool kZones{"/usr/bin/zonetally -l", "sys.oxbow.tarnkit.reporting.memorylog.zones",
                       [](std::string_view) { return true; }};
-
-TarnReportingMemoryLogLimiter& limiter() {
-  static TarnReportingMemoryLogLimiter instance;
-  return instance;
-}
 
 // These lines are read by programs that look for the tag at their beginning: no module stands before it.
 template <class... Arguments>
@@ -201,7 +197,7 @@ void TarnReportingSessionMemoryLogWorker::handleMessage(const std::shared_ptr<Ta
     return;
   }
   const platform::Clock& clock = TarnReportingFacilities().clock;
-  if (!limiter().claim(clock.monotonic())) {
+  if (!ProcessState::of<TarnReportingMemoryLogLimiter>()->claim(clock.monotonic())) {
     return;
   }
   const auto zones = startTool(kZones);

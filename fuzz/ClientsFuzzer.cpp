@@ -11,7 +11,6 @@
 #include <utility>
 #include <vector>
 
-#include "derived/TarnReportingSystemMonitor.h"
 #include "fuzz/ClientsModel.h"
 #include "service/TarnReportingClientServerInstance.h"
 #include "service/TarnReportingService.h"
@@ -128,8 +127,6 @@ class Run {
     for (const auto& connection : platform_.listener.connections()) connection->invalidate();
     platform_.workQueues.dropAll();
     service_.reset();
-    TarnReportingSystemMonitor::reset();
-    TarnReportingSession::setAllWorkerClasses({});
   }
   Run(const Run&) = delete;
   Run& operator=(const Run&) = delete;

@@ -54,9 +54,9 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     const std::span<std::byte> space = buffer.space();
     const std::size_t count = std::min({piece, size - at, space.size()});
     check(count > 0);
+    check(space.size() <= kMaxFrameBytes + FrameBuffer::kGulpBytes);
     std::memcpy(space.data(), data + at, count);
     buffer.received(count);
-    check(buffer.capacityBytes() <= kMaxFrameBytes + FrameBuffer::kGulpBytes);
     at += count;
     piece = piece * 7 % 257 + 1;
     std::span<const std::byte> frame;

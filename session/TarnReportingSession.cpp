@@ -4,6 +4,7 @@
 
 #include "platform/Facilities.h"
 #include "platform/TracePoints.h"
+#include "service/vocabulary/ProcessState.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
 #include "service/vocabulary/TarnReportingUtility.h"
@@ -21,8 +22,10 @@ constexpr std::uint32_t kTraceStopped = 0x21044830;
 constexpr std::uint32_t kTraceDestroyed = 0x21044834;
 
 // The table of worker classes and, once the first session is made, the lists derived from it.
-std::span<const TarnReportingSessionWorkerClass> allWorkerClasses;
-std::optional<TarnReportingSessionWorkerClasses> derivedClasses;
+struct ClassLists {
+  std::span<const TarnReportingSessionWorkerClass> all;
+  std::optional<TarnReportingSessionWorkerClasses> derived;
+};
 
 void trace(std::uint32_t code, std::int64_t reporterID) {
   TarnReportingFacilities().tracePoints.emit(code, reporterID);
@@ -36,19 +39,19 @@ void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
 }  // namespace
 
 void TarnReportingSession::setAllWorkerClasses(std::span<const TarnReportingSessionWorkerClass> table) {
-  allWorkerClasses = table;
-  derivedClasses.reset();
+  *ProcessState::of<ClassLists>() = {table, std::nullopt};
 }
 
 std::span<const TarnReportingSessionWorkerClass> TarnReportingSession::getAllWorkerClasses() {
-  return allWorkerClasses;
+  return ProcessState::of<ClassLists>()->all;
 }
 
 const TarnReportingSessionWorkerClasses& TarnReportingSession::workerClasses() {
-  if (!derivedClasses) {
-    derivedClasses.emplace(allWorkerClasses);
+  const auto lists = ProcessState::of<ClassLists>();
+  if (!lists->derived) {
+    lists->derived.emplace(lists->all);
   }
-  return *derivedClasses;
+  return *lists->derived;
 }
 
 std::shared_ptr<TarnReportingSession> TarnReportingSession::initWithID(std::int64_t reporterID,

@@ -31,8 +31,8 @@ class TarnReportingSession : public std::enable_shared_from_this<TarnReportingSe
   };
   using MessagePointer = std::shared_ptr<TarnReportingSessionMessage>;
 
-  // Hands over the table of worker classes; it must outlive every session. Before the first session is made (or in a
-  // test's fixture).
+  // Hands over the table of worker classes for as long as the facilities are installed; it must outlive every session.
+  // Before the first session is made.
   static void setAllWorkerClasses(std::span<const TarnReportingSessionWorkerClass> table);
   static std::span<const TarnReportingSessionWorkerClass> getAllWorkerClasses();
 

@@ -1,8 +1,8 @@
 // FakePlatform: a whole platform of fakes, installed for as long as it lives. A test's fixture holds one.
 //
 // At its end, work that never ran and replies that never came are destroyed while the facilities are still there, then
-// they are taken away, and with them every process-wide answer that was read from them; so one test leaves nothing to
-// the next.
+// they are taken away, and with them all that the process shared on them (ProcessState.h); so one test leaves nothing
+// to the next.
 #pragma once
 
 #include <chrono>

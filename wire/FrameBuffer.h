@@ -47,8 +47,6 @@ class FrameBuffer {
   std::size_t pendingBytes() const noexcept { return end_ - begin_; }
   // The length that the unfinished or refused frame announces; 0 while that is not known.
   std::size_t announcedBytes() const noexcept;
-  // Bytes of memory held.
-  std::size_t capacityBytes() const noexcept { return capacity_; }
   // Gives the memory back when no bytes are pending; for connections that have gone quiet.
   void release() noexcept;
 

@@ -11,6 +11,7 @@
 
 #include "platform/Facilities.h"
 #include "plist/Dictionary.h"
+#include "service/vocabulary/ProcessState.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
 #include "session/TarnReportingSession.h"
@@ -99,31 +100,21 @@ void send(TarnReportingSession& session, plist::Dictionary stats, AudioEventType
 // The process's one and the lock on it.
 struct Shared {
   std::mutex lock;
-  std::shared_ptr<const TarnReportingDriverUtility> utility;
+  std::shared_ptr<const TarnReportingDriverUtility> utility;  // guarded by lock
 };
-
-Shared& theShared() {
-  static Shared theOne;
-  return theOne;
-}
 
 }  // namespace
 
 std::shared_ptr<const TarnReportingDriverUtility> TarnReportingDriverUtility::shared() {
-  const std::lock_guard guard(theShared().lock);
+  const auto shared = ProcessState::of<Shared>();
+  const std::lock_guard guard(shared->lock);
   platform::FlumeService* const flume = TarnReportingFacilities().flume;
-  if (theShared().utility == nullptr && flume != nullptr) {
+  if (shared->utility == nullptr && flume != nullptr) {
     const auto utility = std::make_shared<TarnReportingDriverUtility>(*flume);
     utility->init();
-    theShared().utility = utility;
+    shared->utility = utility;
   }
-  return theShared().utility;
-}
-
-void TarnReportingDriverUtility::reset() {
-  std::shared_ptr<const TarnReportingDriverUtility> utility;  // dies behind the lock
-  const std::lock_guard guard(theShared().lock);
-  utility.swap(theShared().utility);
+  return shared->utility;
 }
 
 void TarnReportingDriverUtility::init() {

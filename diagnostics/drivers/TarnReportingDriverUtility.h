@@ -6,9 +6,8 @@
 //
 // A failure is logged and skips only the driver or channel that it concerns.
 //
-// One for the process: shared() makes it, which subscribes to the driver groups, and keeps it until reset(). What it
-// holds doesn't change after that; the sessions' snapshots are their own. Threads: shared and reset any, the
-// rest the server queue.
+// One for the process: shared() makes it, which subscribes to the driver groups. What it holds doesn't change after
+// that; the sessions' snapshots are their own. Threads: shared() any, the rest the server queue.
 #pragma once
 
 #include <map>
@@ -35,8 +34,6 @@ class TarnReportingDriverUtility {
 
   // The process's one, made when there is none; nothing on a platform without report channels.
   static std::shared_ptr<const TarnReportingDriverUtility> shared();
-  // Drops the process's one; who holds it may still use it while its service lives.
-  static void reset();
 
   // Without subscriptions. The service outlives the utility.
   explicit TarnReportingDriverUtility(platform::FlumeService& flume) : flume_(flume) {}

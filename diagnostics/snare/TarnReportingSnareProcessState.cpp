@@ -1,36 +1,12 @@
 #include "diagnostics/snare/TarnReportingSnareProcessState.h"
 
 #include "diagnostics/snare/WorkerInstanceState.h"
+#include "service/vocabulary/ProcessState.h"
 
 namespace tarn {
 
-namespace {
-
-// The shared instance and the lock on it.
-struct Shared {
-  std::mutex lock;
-  std::shared_ptr<TarnReportingSnareProcessState> instance;
-};
-
-Shared& theShared() {
-  static Shared theOne;
-  return theOne;
-}
-
-}  // namespace
-
 std::shared_ptr<TarnReportingSnareProcessState> TarnReportingSnareProcessState::shared() {
-  const std::lock_guard guard(theShared().lock);
-  if (theShared().instance == nullptr) {
-    theShared().instance = std::make_shared<TarnReportingSnareProcessState>();
-  }
-  return theShared().instance;
-}
-
-void TarnReportingSnareProcessState::reset() {
-  std::shared_ptr<TarnReportingSnareProcessState> instance;  // dies behind the lock
-  const std::lock_guard guard(theShared().lock);
-  instance.swap(theShared().instance);
+  return ProcessState::of<TarnReportingSnareProcessState>();
 }
 
 std::shared_ptr<WorkerInstanceState> TarnReportingSnareProcessState::stateFor(

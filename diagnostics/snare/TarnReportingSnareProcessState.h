@@ -1,7 +1,7 @@
 // TarnReportingSnareProcessState: what the Snare worker's fault detectors remember across sessions.
 //
-// Some faults show only over many short sessions, so their counts belong to the process. One shared instance: made by
-// the first Snare worker and kept until reset(). It holds as many states as there are detector classes that share one.
+// Some faults show only over many short sessions, so their counts belong to the process. One shared instance, made by
+// the first Snare worker. It holds as many states as there are detector classes that share one.
 //
 // Threads: any.
 #pragma once
@@ -24,10 +24,8 @@ class TarnReportingSnareProcessState {
     std::optional<double> lastFire;  // epoch seconds; guarded by lock
   };
 
-  // The shared instance; made when there is none.
+  // The shared instance.
   static std::shared_ptr<TarnReportingSnareProcessState> shared();
-  // Drops the shared instance. Who holds a state of it keeps that; the next worker begins with fresh ones.
-  static void reset();
 
   TarnReportingSnareProcessState() = default;
   TarnReportingSnareProcessState(const TarnReportingSnareProcessState&) = delete;

@@ -60,11 +60,6 @@ void JournalLog::write(const platform::LogEntry& entry) noexcept {
   }
 }
 
-std::uint64_t JournalLog::lostEntries() const {
-  const std::lock_guard lock(mutex_);
-  return lost_;
-}
-
 // 0 or an errno value.
 int JournalLog::sendEntry(const platform::LogEntry& entry) {
   std::vector<std::string> texts;

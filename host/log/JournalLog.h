@@ -36,15 +36,13 @@ class JournalLog final : public platform::Log {
   static std::optional<std::string> unavailable();
 
   void write(const platform::LogEntry& entry) noexcept override;
-  // Entries lost and not yet told.
-  std::uint64_t lostEntries() const;
 
  private:
   int sendEntry(const platform::LogEntry& entry);
 
   const Send send_;
-  mutable std::mutex mutex_;
-  std::uint64_t lost_ = 0;  // guarded by mutex_, as is lostError_
+  std::mutex mutex_;
+  std::uint64_t lost_ = 0;  // entries lost and not yet told; guarded by mutex_, as is lostError_
   int lostError_ = 0;
 };
 

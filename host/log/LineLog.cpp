@@ -43,11 +43,6 @@ void LineLog::write(const platform::LogEntry& entry) noexcept {
   }
 }
 
-std::uint64_t LineLog::lostLines() const {
-  const std::lock_guard lock(mutex_);
-  return lost_;
-}
-
 int LineLog::writeLost() {
   const std::string text =
       prefixed("LineLog", std::to_string(lost_) + " log lines were lost" + errorSuffix(lostError_));

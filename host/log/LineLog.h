@@ -23,8 +23,6 @@ class LineLog : public platform::Log {
   LineLog& operator=(const LineLog&) = delete;
 
   void write(const platform::LogEntry& entry) noexcept final;
-  // Lines lost and not yet told.
-  std::uint64_t lostLines() const;
 
  protected:
   LineLog(const platform::Clock& clock, platform::LogLevel threshold);
@@ -41,8 +39,8 @@ class LineLog : public platform::Log {
 
   const platform::Clock& clock_;
   bool mayStall_ = false;  // constant after construction
-  mutable std::mutex mutex_;
-  std::uint64_t lost_ = 0;  // guarded by mutex_, as are all below
+  std::mutex mutex_;
+  std::uint64_t lost_ = 0;  // lines lost and not yet told; guarded by mutex_, as are all below
   int lostError_ = 0;
   bool torn_ = false;  // the last line was cut off in the middle
 };

@@ -186,15 +186,4 @@ std::string ListenSocket::listen(mode_t mode) {
   return {};
 }
 
-ListenSocket::Result ListenSocket::bindTo(const std::string& path, mode_t mode) {
-  Result result = claim(path);
-  if (result.error.empty()) {
-    result.error = result.socket.listen(mode);
-  }
-  if (!result.error.empty()) {
-    result.socket = ListenSocket();
-  }
-  return result;
-}
-
 }  // namespace tarn::linux_host

@@ -38,8 +38,6 @@ class ListenSocket {
   // Listens at the claimed path, with this file mode before anybody can connect; one that was handed over listens
   // already. What went wrong, or nothing.
   [[nodiscard]] std::string listen(mode_t mode = kDefaultMode);
-  // Both in one.
-  static Result bindTo(const std::string& path, mode_t mode = kDefaultMode);
 
   int descriptor() const noexcept { return socket_.get(); }
   // Whether there is one, claimed or listening.

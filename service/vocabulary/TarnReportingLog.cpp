@@ -113,9 +113,6 @@ void shorten(std::string& line) {
 
 namespace detail {
 
-// NOLINTNEXTLINE(cppcoreguidelines-avoid-non-const-global-variables): one for the process, that is its point
-constinit const platform::Log* installedLog = nullptr;
-
 void logWrite(const platform::LogCategory& category, LogLevel level, std::string_view module, const LogText& text,
               std::initializer_list<LogArgument> arguments) {
   std::string line;

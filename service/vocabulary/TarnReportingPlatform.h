@@ -8,8 +8,8 @@ struct Facilities;
 }
 
 // Installs the facilities for everything that follows; they must outlive all use. Called by the entry point or by a
-// test fixture, before any other part of the system runs. A null pointer takes them away again (for fixtures), and with
-// them every process-wide answer that was read from them.
+// test fixture, before any other part of the system runs. A null pointer takes them away again (for fixtures). What the
+// process shared on the facilities before these goes with them (ProcessState.h).
 void TarnReportingInstallFacilities(const platform::Facilities* facilities);
 
 // The installed facilities. Threads: any.

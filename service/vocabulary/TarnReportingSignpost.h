@@ -24,8 +24,6 @@ namespace detail {
 // The switch of the installed facility, or one that is never on; kept here so that the test is one load and one branch.
 // NOLINTNEXTLINE(cppcoreguidelines-avoid-non-const-global-variables)
 extern const std::atomic<bool>* signpostSwitch;
-// Takes the facility in, or away when there is none.
-void installSignposts(platform::Signposts* signposts) noexcept;
 
 // An interval that is being recorded.
 struct OpenSignpost {

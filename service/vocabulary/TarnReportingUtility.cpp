@@ -13,7 +13,7 @@
 #include "platform/Facilities.h"
 #include "platform/FileSystem.h"
 #include "platform/WorkQueue.h"
-#include "service/vocabulary/TarnReportingInstallation.h"
+#include "service/vocabulary/ProcessState.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
 
@@ -130,11 +130,11 @@ void TarnReportingUtilitySignal(platform::Condition& condition, bool& flag) {
 }
 
 bool TarnReportingUtilityIsInternalBuild() {
-  detail::Installation& installation = detail::currentInstallation();
-  std::call_once(installation.internalBuildOnce, [&installation] {
-    installation.internalBuild = installation.facilities.deviceProperties.boolean("InternalBuild").value_or(false);
+  ProcessState& process = ProcessState::current();
+  std::call_once(process.internalBuildOnce, [&process] {
+    process.internalBuild = process.facilities.deviceProperties.boolean("InternalBuild").value_or(false);
   });
-  return installation.internalBuild;
+  return process.internalBuild;
 }
 
 std::string TarnReportingUtilityRetrieveAppName(const plist::Dictionary& message) {
@@ -196,12 +196,12 @@ std::string TarnReportingLogsDirectory() {
 }
 
 const std::shared_ptr<platform::WorkQueue>& TarnReportingUtilityGetReportingServerQueue() {
-  detail::Installation& installation = detail::currentInstallation();
-  std::call_once(installation.serverQueueOnce, [&installation] {
-    installation.serverQueue = installation.facilities.workQueues.makeSerialQueue(
-        kServerQueueName, platform::QualityOfService::UserInteractive);
+  ProcessState& process = ProcessState::current();
+  std::call_once(process.serverQueueOnce, [&process] {
+    process.serverQueue =
+        process.facilities.workQueues.makeSerialQueue(kServerQueueName, platform::QualityOfService::UserInteractive);
   });
-  return installation.serverQueue;
+  return process.serverQueue;
 }
 
 }  // namespace tarn

@@ -4,6 +4,7 @@
 
 #include "platform/DefaultsStore.h"
 #include "platform/Facilities.h"
+#include "service/vocabulary/ProcessState.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
 
@@ -31,8 +32,7 @@ void store(std::string_view key, const plist::ValueView& value) {
 }  // namespace
 
 std::shared_ptr<TarnReportingRegistrationState> TarnReportingRegistrationState::shared() {
-  static const auto state = std::make_shared<TarnReportingRegistrationState>();
-  return state;
+  return ProcessState::of<TarnReportingRegistrationState>();
 }
 
 platform::MaybeError TarnReportingRegistrationState::enumerate() {

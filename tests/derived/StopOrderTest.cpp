@@ -20,9 +20,6 @@ namespace {
 using namespace testing;
 
 class StopOrder : public SummaryJsonFileFixture {
- public:
-  ~StopOrder() override { TarnReportingSystemMonitor::reset(); }
-
  protected:
   // A session that played in a group at two volumes, recorded, heard the ringer switched off, and is about to stop. It
   // has every worker that derives or shows messages, in the order in which the service makes them.

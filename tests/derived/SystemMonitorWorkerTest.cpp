@@ -24,7 +24,6 @@ constexpr const char* kRingerChanged = "sys.oxbow.homeshell.ringerstate";
 class SystemMonitorWorker : public SessionFixture {
  public:
   SystemMonitorWorker() { useWorkers<TarnReportingSessionSystemMonitorWorker, ConsumerWorker>(); }
-  ~SystemMonitorWorker() override { TarnReportingSystemMonitor::reset(); }
 
  protected:
   static void startMonitor() {

@@ -7,6 +7,7 @@
 #include <thread>
 #include <vector>
 
+#include "service/vocabulary/TarnReportingPlatform.h"
 #include "service/vocabulary/TarnReportingUtility.h"
 #include "testing/FakePlatform.h"
 
@@ -25,9 +26,6 @@ constexpr const char* kRinger = "ringerstate";
 constexpr const char* kRingerChanged = "sys.oxbow.homeshell.ringerstate";
 
 class TarnReportingSystemMonitorTest : public ::testing::Test {
- public:
-  ~TarnReportingSystemMonitorTest() override { TarnReportingSystemMonitor::reset(); }
-
  protected:
   void start() { TarnReportingSystemMonitor::initializeWithQueue(TarnReportingUtilityGetReportingServerQueue()); }
   plist::Dictionary state(const char* feature) {
@@ -315,6 +313,13 @@ TEST_F(TarnReportingSystemMonitorTest, InitializationAfterResetMakesAFreshInstan
   start();
   EXPECT_NE(TarnReportingSystemMonitor::getSystemMonitorDictionary(), old);
   EXPECT_TRUE(state(kRinger).empty());
+}
+
+TEST_F(TarnReportingSystemMonitorTest, TheEndOfTheInstallationCancelsEveryRegistration) {
+  start();
+  TarnReportingInstallFacilities(&platform_.facilities());
+  EXPECT_EQ(platform_.notifications.cancelledTokens(), (std::vector<std::int32_t>{1, 2, 3}));
+  EXPECT_EQ(TarnReportingSystemMonitor::getSystemMonitorDictionary(), nullptr);
 }
 
 TEST_F(TarnReportingSystemMonitorTest, DeliveryUnderWayAtResetChangesNothing) {

@@ -25,9 +25,6 @@ class MemoryLogWorker : public SessionFixture {
  protected:
   MemoryLogWorker() {
     useWorkers<Worker, ConsumerWorker>();
-    // The limiter is the process's: each test begins long after the one before.
-    static int tests = 0;
-    platform_.clock.setMonotonic(std::chrono::hours(++tests));
     runToolsDuringWaits();
   }
 

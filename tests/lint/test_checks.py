@@ -11,6 +11,7 @@ import banned_calls  # noqa: E402
 import include_graph  # noqa: E402
 import seeds  # noqa: E402
 import sizes  # noqa: E402
+import statics  # noqa: E402
 import wording  # noqa: E402
 from tree import Tree, code_only  # noqa: E402
 
@@ -265,6 +266,73 @@ class Sizes(unittest.TestCase):
     def test_wide_lines_of_texts_are_reported_but_tables_and_links_are_not(self):
         self.assertEqual(found(sizes, {"docs/a.md": "x" * 120 + "\n" + "y" * 121 + "\n"}), [("docs/a.md", 2)])
         self.assertEqual(found(sizes, {"docs/a.md": "|" + "x" * 130 + "|\n" + "https://" + "x" * 130 + "\n"}), [])
+
+
+class Statics(unittest.TestCase):
+    MUTABLE = (
+        "int count = 0;", "int count;", "int count{};", "static int count = 0;", "namespace tarn {\nint count = 0; }",
+        "std::string text;", "std::vector<int> list{1, 2};", "int table[4] = {};", "int count(5);", "Text text(\"a\");",
+        "std::atomic<int> count{0};", "std::once_flag once;", "std::mutex lock;", "thread_local int depth = 0;",
+        "inline int count = 0;", "constinit int count = 0;", "[[maybe_unused]] int count = 0;",
+        "const char* name = nullptr;", "Table* const table = make();", "Table& table = make();",
+        "const char* names[2];",
+        "const std::shared_ptr<Table> table;", "const auto table = std::make_shared<Table>();",
+        "std::function<void(int)> handler;", "auto handler = [] { return 1; };", "struct { int a; } state;",
+        "static int made = std::invoke([] { return 1; });",
+        "int f() { static int count = 0; return ++count; }", "void f() { if (x) { static Table table; } }",
+        "void f() { static Table table(argument); }", "void f() { static const auto t = std::make_unique<Table>(); }",
+        "Table& f() { static Table* const table = new Table; return *table; }",
+        "void f() { run([] { static int count = 0; ++count; }); }", "A::A() : a_{1}, b_{2} { static int count = 0; }",
+        "class A { static inline int count = 0; };", "class A { inline static std::atomic<int> count{0}; };",
+        "struct A { void f() { static int count = 0; } };", "class A {\n public:\n  static int count;\n};",
+        "template <class T>\nvoid f() { static T value; }", "class A { static inline thread_local int count = 0; };",
+    )
+    FINE = (
+        "constexpr int kCount = 1;", "const int kCount = 1;", "constinit const std::atomic<bool> kNever{false};",
+        "inline const plist::Key kName{\"name\"};", "constexpr std::array<int, 2> kList{{1, 2}};",
+        "constexpr std::size_t kMost = std::size_t{1} << 20U;", "const char* const kName = \"name\";",
+        "constexpr const char* kNames[] = {\"a\"};", "const Table& kTable = table();", "extern int count;",
+        "constexpr Operations kOperations{[] { return std::make_unique<Table>(); }, [] {}};",
+        "const std::shared_ptr<const Table> kTable;",
+        "int f();", "static int f(int a);", "std::vector<int> f(const std::function<void()>& work);",
+        "auto f() -> std::vector<int>;", "bool operator==(const A& a, const A& b);", "using List = std::vector<int>;",
+        "typedef int Count;", "class A;", "enum class A { one, two };", "static_assert(sizeof(int) == 4);",
+        "template <class T>\nconstexpr char kTag = 0;", "struct A { int count = 0; std::mutex lock; };",
+        "class A { static int f(); static constexpr int kCount = 0; static const int kOther = 1; };",
+        "class A { static std::function<void()> f(); };", "class A { A() : a_{1}, b_(2) {} int a_ = 0; int b_; };",
+        "void f() { int count = 0; static const plist::Key kKey(\"key\"); static constexpr int kCount = 1; }",
+        "int f() {\n  for (int i = 0; i < 3; ++i) {}\n  *p = 1;\n  return 0;\n}\nint g();", "// int count = 0;",
+        "#define COUNT int count = 0;\n", "A::A() : a_{1}, b_{2} {}\nint f();", "friend class B;",
+    )
+
+    def test_mutable_state_of_the_process_is_reported(self):
+        for text in self.MUTABLE:
+            with self.subTest(text):
+                self.assertEqual(len(found(statics, {"session/A.cpp": text + "\n"})), 1)
+
+    def test_constants_functions_and_members_are_fine(self):
+        for text in self.FINE:
+            with self.subTest(text):
+                self.assertEqual(found(statics, {"session/A.cpp": text + "\n"}), [])
+
+    def test_the_line_is_told_and_lines_after_it_are_seen(self):
+        text = "int f() {\n  static int a = 0;\n  return a;\n}\n\nint b = 0;\n"
+        self.assertEqual(found(statics, {"host/loop/A.cpp": text}), [("host/loop/A.cpp", 2), ("host/loop/A.cpp", 6)])
+
+    def test_the_home_and_what_is_no_product_may_hold_state(self):
+        for path in (statics.HOME, "tests/session/A.cpp", "bench/A.cpp", "fuzz/A.cpp"):
+            self.assertEqual(found(statics, {path: "int count = 0;\n"}), [])
+
+    def test_each_exception_is_there_and_has_its_reason(self):
+        tree = Tree.at(os.path.join(HERE, "..", ".."))
+        for (path, name), reason in statics.EXCEPTIONS.items():
+            with self.subTest(path):
+                self.assertIn(name, [each for _, each in statics.statics(tree.files[path])])
+                self.assertTrue(reason.strip())
+
+    def test_every_folder_of_the_product_is_looked_at(self):
+        rooms = [room for room in include_graph.ROOMS if not room.startswith(("tests/", "tools/mutate"))]
+        self.assertEqual([room for room in rooms if not (room + "/").startswith(statics.PRODUCT)], [])
 
 
 class Wording(unittest.TestCase):

@@ -10,9 +10,6 @@
 #include <utility>
 #include <vector>
 
-#include "derived/TarnReportingSystemMonitor.h"
-#include "diagnostics/drivers/TarnReportingDriverUtility.h"
-#include "diagnostics/snare/TarnReportingSnareProcessState.h"
 #include "plist/Dictionary.h"
 #include "service/TarnReportingClientServerInstance.h"
 #include "service/TarnReportingService.h"
@@ -53,10 +50,6 @@ class ServiceFixture : public ::testing::Test {
     }
     platform_.workQueues.dropAll();
     service_.reset();
-    TarnReportingSystemMonitor::reset();
-    TarnReportingSnareProcessState::reset();
-    TarnReportingDriverUtility::reset();
-    TarnReportingSession::setAllWorkerClasses({});
   }
 
   // A connected client process.

@@ -1,5 +1,6 @@
 #include "service/TarnReportingService.h"
 
+#include "derived/TarnReportingSystemMonitor.h"
 #include "tests/service/ServiceFixture.h"
 
 namespace tarn {

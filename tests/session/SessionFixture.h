@@ -11,6 +11,7 @@
 
 #include "plist/Dictionary.h"
 #include "service/vocabulary/TarnReportingLog.h"
+#include "service/vocabulary/TarnReportingPlatform.h"
 #include "session/TarnReportingSession.h"
 #include "session/TarnReportingSessionMessage.h"
 #include "session/TarnReportingSessionWorkerClass.h"
@@ -150,10 +151,7 @@ class SessionFixture : public ::testing::Test {
     script() = {};
     useWorkers({});
   }
-  ~SessionFixture() override {
-    script() = {};
-    TarnReportingSession::setAllWorkerClasses({});
-  }
+  ~SessionFixture() override { script() = {}; }
 
   void useWorkers(std::vector<TarnReportingSessionWorkerClass> table) {
     table_ = std::move(table);
@@ -162,6 +160,11 @@ class SessionFixture : public ::testing::Test {
   template <class... Workers>
   void useWorkers() {
     useWorkers({TarnReportingSessionWorkerClass::of<Workers>()...});
+  }
+  // Another installation of the same platform and workers: what the process shares begins afresh.
+  void installAnew() {
+    TarnReportingInstallFacilities(&platform_.facilities());
+    TarnReportingSession::setAllWorkerClasses(table_);
   }
 
   static std::shared_ptr<TarnReportingSession> makeSession(

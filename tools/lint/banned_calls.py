@@ -15,7 +15,7 @@ TRIALS = ("tests/*", "bench/*", "fuzz/*")
 REAL_TIME = ("tests/e2e/*", "tests/scenario/*", "tests/host/*", "tests/recorder/*", "tests/client/*",
              "tests/*Stress*", "bench/*", "tools/*", "host/system/FileLock.cpp", "recorder/store/EventReader.cpp")
 # A fatal check on our own mistakes, where there is no log yet or no longer.
-LAST_WORDS = ("service/vocabulary/TarnReportingPlatform.cpp", "client/OwnerCheck.cpp", "testing/*")
+LAST_WORDS = ("service/vocabulary/ProcessState.cpp", "client/OwnerCheck.cpp", "testing/*")
 NOWHERE = ()
 
 

@@ -1,7 +1,7 @@
 #!/usr/bin/env python3
 """Runs the checks of this folder over the tree and prints what they find, a line each. Exit 1 when there is anything.
 
-usage: check.py [include_graph|banned_calls|seeds|sizes|wording ...]
+usage: check.py [include_graph|banned_calls|seeds|sizes|statics|wording ...]
 """
 
 import os
@@ -11,10 +11,11 @@ import banned_calls
 import include_graph
 import seeds
 import sizes
+import statics
 import wording
 from tree import Tree
 
-CHECKS = {module.__name__: module.check for module in (include_graph, banned_calls, seeds, sizes, wording)}
+CHECKS = {module.__name__: module.check for module in (include_graph, banned_calls, seeds, sizes, statics, wording)}
 
 
 def main(names):

@@ -50,7 +50,6 @@ inline FlumeChannel stateChannel(FlumeChannelName name, std::vector<platform::Fl
 class DriverFixture : public SessionFixture {
  public:
   DriverFixture() { useWorkers<ConsumerWorker, TarnReportingSessionDriverSnapshotWorker>(); }
-  ~DriverFixture() override { TarnReportingDriverUtility::reset(); }
 
  protected:
   using Step = FakeFlumeService::Step;

@@ -246,7 +246,7 @@ TEST_F(DriverModel, MessagesAgreeWithTheModelOverRandomChannels) {
         source.channels = start;
         session->start();
       }
-      TarnReportingDriverUtility::reset();
+      installAnew();
       platform_.log.clear();
     }
     platform_.facilities().flume = &platform_.flume;

@@ -176,12 +176,12 @@ TEST_F(DriverSnapshotWorker, FirstUsesOnManyThreadsMakeOneUtility) {
   EXPECT_EQ(platform_.log.count("creating flume driver utility"), 1U);
 }
 
-TEST_F(DriverSnapshotWorker, AfterAResetTheGroupsAreLookedUpAnew) {
+TEST_F(DriverSnapshotWorker, AnotherInstallationLooksTheGroupsUpAnew) {
   count(1);
   const auto session = makeSession();
   session->start();
   session->stop();
-  TarnReportingDriverUtility::reset();
+  installAnew();
   session->start();
   EXPECT_EQ(flume_.calls(Step::CopyChannels), 18U);
 }

@@ -26,10 +26,6 @@ class SnareFixture : public SessionFixture {
     platform_.deviceProperties.set("haptics", true);
     useWorkers<Worker>();
   }
-  ~SnareFixture() override {
-    platform_.snare.replies().dropAll();
-    TarnReportingSnareProcessState::reset();
-  }
 
   static Session startedSession(AudioServiceType type, std::int64_t reporterID = 7,
                                 TarnReportingSession::Mode mode = TarnReportingSession::Mode::Ordinary) {

@@ -90,13 +90,13 @@ TEST_F(SnareHapticLeaks, ARepeatInAnotherSessionDoesNotCount) {
   EXPECT_TRUE(calls().empty());
 }
 
-TEST_F(SnareHapticLeaks, StateIsSharedByClassAndFreshBehindAReset) {
+TEST_F(SnareHapticLeaks, StateIsSharedByClassAndFreshInAnotherInstallation) {
   const Session first = startedSession(AudioServiceType::Haptics, 7);
   first->sendMessage(hapticLeak(1));
   const Session second = startedSession(AudioServiceType::Haptics, 8);
   EXPECT_EQ(&stateOf(first, kHapticLeaks), &stateOf(second, kHapticLeaks));
   EXPECT_NE(&stateOf(first, kHapticLeaks), &stateOf(first, kSSSLeaks));
-  TarnReportingSnareProcessState::reset();
+  installAnew();
   const Session third = startedSession(AudioServiceType::Haptics, 9);
   EXPECT_EQ(stateOf(third, kHapticLeaks).interestedCount, 0U);
   EXPECT_EQ(stateOf(first, kHapticLeaks).interestedCount, 1U);

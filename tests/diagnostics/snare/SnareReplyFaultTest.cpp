@@ -48,12 +48,12 @@ TEST_F(SnareReplyFault, AReplyBehindTheEndOfTheSessionIsLogged) {
   EXPECT_TRUE(logged(LogLevel::Info, kAlarmLowRMS, kAlarmStarted));
 }
 
-TEST_F(SnareReplyFault, AReplyBehindTheResetOfTheProcessWideStateIsLogged) {
+TEST_F(SnareReplyFault, AReplyInAnotherInstallationIsLogged) {
   platform_.snare.replies().set(ReplyFault::Hold);
   Session session = startedSession(AudioServiceType::SystemSounds);
   session->sendMessage(stuckSound(1));
   session.reset();
-  TarnReportingSnareProcessState::reset();
+  installAnew();
   EXPECT_EQ(platform_.snare.replies().deliverHeld(), 1U);
   EXPECT_TRUE(platform_.log.contains("Started Snare session for system sound server leaks. sessionId=capture-1"));
 }
@@ -108,7 +108,7 @@ TEST_F(SnareReplyFault, UnderEveryFaultTheSessionStopsAndNothingIsAskedTwice) {
   std::int64_t reporterID = 100;
   for (const ReplyFault fault :
        {ReplyFault::None, ReplyFault::Drop, ReplyFault::Hold, ReplyFault::Twice, ReplyFault::OtherThread}) {
-    TarnReportingSnareProcessState::reset();
+    installAnew();
     platform_.snare.replies().set(fault);
     const std::size_t before = calls().size();
     Session session = startedSession(AudioServiceType::Alarms, ++reporterID);

@@ -55,7 +55,6 @@ TEST_F(SnareReplyStress, RepliesMeetStopsRestartsAndTheEndOfSessions) {
         session->stop();
         session->start();
       }
-      if (random() % 20 == 0) TarnReportingSnareProcessState::reset();
       session.reset();  // released without a stop
     }
     ASSERT_TRUE(recorder_->flush(recorder::kPatience));  // its queue takes one round

@@ -56,9 +56,6 @@ class StandInRunner final : public platform::CommandRunner {
 class MemoryLogThreads : public ::testing::Test {
  public:
   MemoryLogThreads() {
-    static int tests = 0;  // the limiter is the process's
-    platform_.clock.setMonotonic(std::chrono::hours(++tests));
-    TarnReportingInstallFacilities(nullptr);
     TarnReportingInstallFacilities(&facilities_);
     TarnReportingSession::setAllWorkerClasses(table_);
     running_.start();
@@ -66,7 +63,6 @@ class MemoryLogThreads : public ::testing::Test {
   ~MemoryLogThreads() override {
     running_.onQueue([this] { sessions_.clear(); });
     running_.stop();
-    TarnReportingSession::setAllWorkerClasses({});
   }
 
  protected:

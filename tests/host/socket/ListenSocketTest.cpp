@@ -15,9 +15,12 @@
 
 #include "tests/host/InChild.h"
 #include "tests/host/ScratchFolder.h"
+#include "tests/host/socket/BoundSocket.h"
 
 namespace tarn::linux_host {
 namespace {
+
+using testing::bindTo;
 
 sockaddr_un addressOf(const std::string& path) {
   sockaddr_un address{};
@@ -52,7 +55,7 @@ class ListenSocketTest : public ::testing::Test {
 };
 
 TEST_F(ListenSocketTest, ListensAtAFreshPath) {
-  const auto result = ListenSocket::bindTo(path_);
+  const auto result = bindTo(path_);
   EXPECT_EQ(result.error, "");
   EXPECT_TRUE(canConnect(path_));
   EXPECT_EQ(result.socket.name(), path_);
@@ -78,8 +81,8 @@ TEST_F(ListenSocketTest, ClaimedPathThatSomethingElseTookIsToldWhenItListens) {
 
 TEST_F(ListenSocketTest, HasTheModeWhateverTheMaskAndLeavesTheMaskAlone) {
   const mode_t before = ::umask(0);
-  const auto usual = ListenSocket::bindTo(path_);
-  const auto wide = ListenSocket::bindTo(folder_.file("wide"), 0666);
+  const auto usual = bindTo(path_);
+  const auto wide = bindTo(folder_.file("wide"), 0666);
   EXPECT_EQ(::umask(before), 0u);
   EXPECT_EQ(modeOf(path_), 0660u);
   EXPECT_EQ(modeOf(folder_.file("wide")), 0666u);
@@ -88,14 +91,14 @@ TEST_F(ListenSocketTest, HasTheModeWhateverTheMaskAndLeavesTheMaskAlone) {
 TEST_F(ListenSocketTest, ReplacesAStaleSocketFile) {
   boundSocket(path_).reset();
   ASSERT_FALSE(canConnect(path_));
-  const auto result = ListenSocket::bindTo(path_);
+  const auto result = bindTo(path_);
   EXPECT_EQ(result.error, "");
   EXPECT_TRUE(canConnect(path_));
 }
 
 TEST_F(ListenSocketTest, RefusesThePathOfAnotherServiceOfItsKind) {
-  const auto first = ListenSocket::bindTo(path_);
-  const auto second = ListenSocket::bindTo(path_);
+  const auto first = bindTo(path_);
+  const auto second = bindTo(path_);
   EXPECT_FALSE(second.socket);
   EXPECT_EQ(second.error, "another service is listening on " + path_);
   EXPECT_TRUE(canConnect(path_));
@@ -104,39 +107,39 @@ TEST_F(ListenSocketTest, RefusesThePathOfAnotherServiceOfItsKind) {
 TEST_F(ListenSocketTest, RefusesASocketThatAnybodyListensOn) {
   const auto live = boundSocket(path_);
   ASSERT_EQ(::listen(live.get(), 5), 0);
-  const auto result = ListenSocket::bindTo(path_);
+  const auto result = bindTo(path_);
   EXPECT_EQ(result.error, "another service is listening on " + path_);
   EXPECT_TRUE(canConnect(path_));
 }
 
 TEST_F(ListenSocketTest, RefusesASocketOfAnotherKindThatIsInUse) {
   const auto live = boundSocket(path_, SOCK_DGRAM);
-  EXPECT_EQ(ListenSocket::bindTo(path_).error, "another service is listening on " + path_);
+  EXPECT_EQ(bindTo(path_).error, "another service is listening on " + path_);
   EXPECT_TRUE(std::filesystem::exists(path_));
 }
 
 TEST_F(ListenSocketTest, NeverRemovesAFileThatIsNoSocket) {
   std::ofstream(path_) << "precious";
-  EXPECT_EQ(ListenSocket::bindTo(path_).error, path_ + " exists and is not a socket");
+  EXPECT_EQ(bindTo(path_).error, path_ + " exists and is not a socket");
   EXPECT_EQ(std::filesystem::file_size(path_), 8u);
 }
 
 TEST_F(ListenSocketTest, SaysWhichPathItCanNotUse) {
   const std::string missing = folder_.file("no/such/folder/socket");
-  EXPECT_NE(ListenSocket::bindTo(missing).error.find(missing), std::string::npos);
-  EXPECT_NE(ListenSocket::bindTo(std::string(200, 'x')).error.find("a path of 1 to 107 bytes"), std::string::npos);
-  EXPECT_NE(ListenSocket::bindTo("").error, "");
+  EXPECT_NE(bindTo(missing).error.find(missing), std::string::npos);
+  EXPECT_NE(bindTo(std::string(200, 'x')).error.find("a path of 1 to 107 bytes"), std::string::npos);
+  EXPECT_NE(bindTo("").error, "");
 }
 
 TEST_F(ListenSocketTest, RemovesItsFilesAtTheEnd) {
-  { const auto result = ListenSocket::bindTo(path_); }
+  { const auto result = bindTo(path_); }
   EXPECT_FALSE(std::filesystem::exists(path_));
   EXPECT_FALSE(std::filesystem::exists(path_ + ".lock"));
 }
 
 TEST_F(ListenSocketTest, LeavesAFileThatIsNoLongerItsOwn) {
   {
-    const auto result = ListenSocket::bindTo(path_);
+    const auto result = bindTo(path_);
     ASSERT_TRUE(std::filesystem::remove(path_));
     std::ofstream(path_) << "another's";
   }
@@ -145,7 +148,7 @@ TEST_F(ListenSocketTest, LeavesAFileThatIsNoLongerItsOwn) {
 
 TEST_F(ListenSocketTest, ALockFileThatNobodyHoldsIsNoObstacle) {
   std::ofstream(path_ + ".lock") << "";
-  EXPECT_EQ(ListenSocket::bindTo(path_).error, "");
+  EXPECT_EQ(bindTo(path_).error, "");
 }
 
 TEST_F(ListenSocketTest, OfManyThatStartAtOnceOneWins) {
@@ -154,7 +157,7 @@ TEST_F(ListenSocketTest, OfManyThatStartAtOnceOneWins) {
     std::vector<ListenSocket::Result> results(6);
     std::vector<std::thread> threads;
     for (auto& result : results) {
-      threads.emplace_back([&result, this] { result = ListenSocket::bindTo(path_); });
+      threads.emplace_back([&result, this] { result = bindTo(path_); });
     }
     for (auto& thread : threads) {
       thread.join();

@@ -14,6 +14,7 @@
 #include "tests/host/Eventually.h"
 #include "tests/host/ScratchFolder.h"
 #include "tests/host/loop/RunningLoop.h"
+#include "tests/host/socket/BoundSocket.h"
 #include "tests/host/socket/RecordingService.h"
 #include "tests/host/socket/TestClient.h"
 
@@ -25,7 +26,7 @@ class SocketFixture : public ::testing::Test {
   void serve() {
     host_ = std::make_unique<linux_host::ConnectionHost>(running_.loop, log_, limits);
     host_->gate.setPauseSource([this] { return paused.load(); });
-    auto socket = linux_host::ListenSocket::bindTo(path_);
+    auto socket = bindTo(path_);
     ASSERT_EQ(socket.error, "");
     listener_ = std::make_shared<linux_host::SocketListener>(*host_, std::move(socket.socket));
     listener_->setDelegate(service_);

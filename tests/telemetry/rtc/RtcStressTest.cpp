@@ -33,10 +33,7 @@ class RtcStress : public ::testing::Test {
     TarnReportingInstallFacilities(&facilities_);
     TarnReportingSession::setAllWorkerClasses(kTable);
   }
-  ~RtcStress() override {
-    platform_.rtcReporting.completions().dropAll();
-    TarnReportingSession::setAllWorkerClasses({});
-  }
+  ~RtcStress() override { platform_.rtcReporting.completions().dropAll(); }
 
   static std::shared_ptr<TarnReportingSession> makeSession(std::int64_t reporterID) {
     auto session = TarnReportingSession::initWithID(reporterID, {1});
