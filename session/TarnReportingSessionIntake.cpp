@@ -19,6 +19,7 @@ namespace tarn {
 namespace {
 
 constexpr std::string_view kModule = "TarnReportingSession";
+constexpr TarnReportingLogger kLog{TarnReportingSessionCategory, kModule};
 constexpr std::uint32_t kTraceMessage = 0x21044838;
 constexpr double kOldestStampSeconds = 31536000;  // 365 days
 
@@ -44,11 +45,10 @@ void TarnReportingSession::sendMessage(const MessagePointer& message, platform::
   TarnReportingFacilities().tracePoints.emit(kTraceMessage, reporterID_);
   message->setIsSessionStarted(started_);
   message->setIsRedundant(messageIsRedundant(*message));
-  TarnReportingLog(
-      TarnReportingSessionCategory(), LogLevel::Debug, kModule,
-      "TarnReportingSessionWorker action=sendMessage reporterID=%lli app=%@ redundant=%@ message=%@", reporterID_,
-      [&] { return TarnReportingUtilityRetrieveAppName(configuration_); }, message->isRedundant() ? "YES" : "NO",
-      message->message());
+  kLog(
+      LogLevel::Debug, "TarnReportingSessionWorker action=sendMessage reporterID=%lli app=%@ redundant=%@ message=%@",
+      reporterID_, [&] { return TarnReportingUtilityRetrieveAppName(configuration_); },
+      message->isRedundant() ? "YES" : "NO", message->message());
   previousValues_.merge(message->message());
   if (!message->isRedundant()) {
     log_.append(message);
@@ -128,7 +128,7 @@ bool TarnReportingSession::messageIsRedundant(const TarnReportingSessionMessage&
   if (earlier == nullptr || !message.message().equalsIgnoring(earlier->message(), kIgnored)) {
     return false;
   }
-  TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, kModule, "marking event redundant");
+  kLog(LogLevel::Debug, "marking event redundant");
   return true;
 }
 
