@@ -238,8 +238,8 @@ TEST_F(SystemMonitorWorker, ObserversDoNotKeepTheDictionaryAlive) {
 TEST_F(SystemMonitorWorker, WithoutAMonitorItRunsAndSendsNothing) {
   const auto session = makeSession();
   session->start();
-  ASSERT_EQ(session->workers().producingMessageWorkers().size(), 1U);
-  EXPECT_TRUE(session->workers().producingMessageWorkers().front().worker->started());
+  ASSERT_EQ(session->workers().messageWorkers().size(), 1U);
+  EXPECT_TRUE(session->workers().messageWorkers().front().worker->started());
   session->stop();
   EXPECT_TRUE(script().received.empty());
 }

@@ -17,6 +17,17 @@ class WorkerSelection : public SessionFixture {
     }
     return names;
   }
+  // Of the workers that the test says.
+  template <class Which>
+  static Strings namesOf(const std::vector<TarnReportingSessionWorkerSet::Member>& members, const Which& which) {
+    Strings names;
+    for (const auto& member : members) {
+      if (which(member)) {
+        names.emplace_back(member.workerClass->name);
+      }
+    }
+    return names;
+  }
   static Strings takeTrail() { return std::exchange(trail(), {}); }
 };
 
@@ -52,9 +63,11 @@ TEST_F(WorkerSelection, CreatedAndStartedSessionHoldsTheStartOnCreationWorkersFi
   session->start();
   EXPECT_EQ(namesOf(session->workers().messageWorkers()),
             (Strings{"EarlyWorker", "PlainWorker", "ProducerWorker", "BothWorker", "ConsumerWorker"}));
-  EXPECT_EQ(namesOf(session->workers().consumingMessageWorkers()),
+  EXPECT_EQ(namesOf(session->workers().messageWorkers(), [](const auto& member) { return member.consumer != nullptr; }),
             (Strings{"EarlyWorker", "BothWorker", "ConsumerWorker"}));
-  EXPECT_EQ(namesOf(session->workers().producingMessageWorkers()), (Strings{"ProducerWorker", "BothWorker"}));
+  EXPECT_EQ(
+      namesOf(session->workers().messageWorkers(), [](const auto& member) { return member.workerClass->isProducer; }),
+      (Strings{"ProducerWorker", "BothWorker"}));
   EXPECT_EQ(session->workerInstanceCount(), 5U);
 }
 
