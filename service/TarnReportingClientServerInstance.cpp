@@ -9,6 +9,7 @@
 #include "service/TarnReportingServiceDelegateProtocol.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
+#include "service/vocabulary/TarnReportingServerQueue.h"
 #include "service/vocabulary/TarnReportingSignpost.h"
 #include "service/vocabulary/TarnReportingUtility.h"
 #include "session/TarnReportingSession.h"
@@ -205,6 +206,7 @@ void TarnReportingClientServerInstance::handleConnectionError() {
 
 std::shared_ptr<TarnReportingSession> TarnReportingClientServerInstance::findReportingSessionForID(
     std::int64_t reporterID, bool acrossAllClients) {
+  TarnReportingRequireServerQueue();
   auto session = sessions_.find(reporterID);
   if (!session && acrossAllClients) {
     if (const auto service = delegate_.lock()) {
@@ -327,6 +329,7 @@ void TarnReportingClientServerInstance::send(plist::Dictionary message, std::uin
 }
 
 void TarnReportingClientServerInstance::endClient() {
+  TarnReportingRequireServerQueue();
   const auto service = delegate_.lock();
   if (!service) {
     return;

@@ -12,6 +12,7 @@
 #include "service/TarnReportingClientServerInstance.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
+#include "service/vocabulary/TarnReportingServerQueue.h"
 #include "service/vocabulary/TarnReportingUtility.h"
 #include "session/TarnReportingSession.h"
 
@@ -127,6 +128,7 @@ void TarnReportingService::handleInvalidation(const std::weak_ptr<TarnReportingC
 }
 
 TarnReportingService::Sessions TarnReportingService::getAllActiveReportingSessions() {
+  TarnReportingRequireServerQueue();
   Sessions active;
   for (const auto& client : clients_) {
     Sessions ofClient;
@@ -201,6 +203,7 @@ std::size_t TarnReportingService::sessionCount() const {
 }
 
 std::shared_ptr<TarnReportingSession> TarnReportingService::retrieveSingleMessageSession() {
+  TarnReportingRequireServerQueue();
   singleMessageSessionLastRetrieved_ = TarnReportingFacilities().clock.monotonic();
   if (!singleMessageSession_) {
     kLog(LogLevel::Default, "Creating singleMessageSession");
@@ -227,6 +230,7 @@ void TarnReportingService::queueStopSingleSession(std::chrono::nanoseconds delay
 }
 
 void TarnReportingService::checkSingleSession() {
+  TarnReportingRequireServerQueue();
   const std::chrono::duration<double> idle =
       TarnReportingFacilities().clock.monotonic() - singleMessageSessionLastRetrieved_;
   if (idle > kTimeout) {

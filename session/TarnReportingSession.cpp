@@ -6,6 +6,7 @@
 #include "platform/TracePoints.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
+#include "service/vocabulary/TarnReportingServerQueue.h"
 #include "service/vocabulary/TarnReportingUtility.h"
 #include "session/TarnReportingSessionKeys.h"
 
@@ -49,6 +50,7 @@ const TarnReportingSessionWorkerClasses& TarnReportingSession::workerClasses() {
 std::shared_ptr<TarnReportingSession> TarnReportingSession::initWithID(std::int64_t reporterID,
                                                                        std::vector<std::int32_t> processIdentifiers,
                                                                        Mode mode) {
+  TarnReportingRequireServerQueue();
   struct Constructible : TarnReportingSession {
     Constructible(std::int64_t theID, std::vector<std::int32_t> identifiers, Mode theMode)
         : TarnReportingSession(theID, std::move(identifiers), theMode) {}
@@ -74,12 +76,14 @@ TarnReportingSession::~TarnReportingSession() {
 }
 
 void TarnReportingSession::setServiceType(AudioServiceType serviceType) {
+  TarnReportingRequireServerQueue();
   serviceType_ = serviceType;
   serviceName_ = TarnReportingUtilityGenerateServiceNameFromServiceType(serviceType);
   kLog(LogLevel::Info, "setting service type %@", serviceName_);
 }
 
 void TarnReportingSession::updateConfigurationWithContentsOfConfiguration(const plist::Dictionary* configuration) {
+  TarnReportingRequireServerQueue();
   static const plist::Key kMirrored("KvHostApplicationDisplayID");
   if (configuration == nullptr) {
     return;
@@ -89,6 +93,7 @@ void TarnReportingSession::updateConfigurationWithContentsOfConfiguration(const 
 }
 
 void TarnReportingSession::start() {
+  TarnReportingRequireServerQueue();
   appendMarker(AudioEventType::Start, "start");
   kLog(LogLevel::Info, "start called. reporterID=%lli", reporterID_);
   if (started_) {
@@ -102,6 +107,7 @@ void TarnReportingSession::start() {
 }
 
 void TarnReportingSession::stop() {
+  TarnReportingRequireServerQueue();
   appendMarker(AudioEventType::Stop, "stop");
   kLog(LogLevel::Debug, "stop called. reporterID=%lli", reporterID_);
   if (!started_) {

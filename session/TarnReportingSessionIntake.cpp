@@ -9,6 +9,7 @@
 #include "plist/Value.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
+#include "service/vocabulary/TarnReportingServerQueue.h"
 #include "service/vocabulary/TarnReportingSignpost.h"
 #include "service/vocabulary/TarnReportingUtility.h"
 #include "session/TarnReportingSession.h"
@@ -36,6 +37,7 @@ std::string withoutBlanks(std::string_view key) {
 }  // namespace
 
 void TarnReportingSession::sendMessage(const MessagePointer& message, platform::Reply<> reply) {
+  TarnReportingRequireServerQueue();
   const TarnReportingSignpost signpost(SignpostCategory::Message, kModule, "sendMessage", {"reporterID", reporterID_});
   ++totalMessageCount_;
   addMissingDates(*message);

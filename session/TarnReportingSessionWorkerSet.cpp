@@ -3,6 +3,7 @@
 #include <algorithm>
 
 #include "service/vocabulary/TarnReportingLog.h"
+#include "service/vocabulary/TarnReportingServerQueue.h"
 #include "service/vocabulary/TarnReportingSignpost.h"
 #include "session/TarnReportingSession.h"
 #include "session/TarnReportingSessionMessage.h"
@@ -59,6 +60,7 @@ bool wants(const Member& member, const TarnReportingSessionMessage& message) {
 
 void TarnReportingSessionWorkerSet::startWorkersFromClasses(const TarnReportingSessionWorkerClasses::List& classes,
                                                             const std::shared_ptr<TarnReportingSession>& session) {
+  TarnReportingRequireServerQueue();
   for (const Class* workerClass : classes) {
     makeWorker(*workerClass, session);
   }
@@ -119,6 +121,7 @@ void TarnReportingSessionWorkerSet::startWorkers(std::int64_t reporterID) {
 }
 
 void TarnReportingSessionWorkerSet::stopWorkers(std::int64_t reporterID) {
+  TarnReportingRequireServerQueue();
   inTurns(messageWorkers_, turnToStop, [reporterID](const Member& member) {
     if (!member.worker->started()) {
       return;
