@@ -28,8 +28,9 @@ TarnReportingSessionMessages TarnReportingDerivedMessages(const TarnReportingSes
 // Derives messages from a session (`derive(session)`) and sends them into it, in order. Before the first, `sendingText`
 // is logged with the reporter ID. Nothing happens when the session is gone or has an empty log.
 template <class Derive>
-void TarnReportingSendDerivedMessages(const std::shared_ptr<TarnReportingSession>& session, std::string_view module,
-                                      const LogText& sendingText, const Derive& derive) {
+void TarnReportingSendDerivedMessages(const std::shared_ptr<TarnReportingSession>& session,
+                                      const TarnReportingLogger& log, const LogText& sendingText,
+                                      const Derive& derive) {
   if (!session || session->messages().empty()) {
     return;
   }
@@ -37,7 +38,7 @@ void TarnReportingSendDerivedMessages(const std::shared_ptr<TarnReportingSession
   if (derived.empty()) {
     return;
   }
-  TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Default, module, sendingText, session->reporterID());
+  log(LogLevel::Default, sendingText, session->reporterID());
   for (const auto& message : derived) {
     session->sendMessage(message);
   }

@@ -7,7 +7,7 @@
 
 #include "derived/TarnReportingDerivation.h"
 #include "derived/TarnReportingMessageFields.h"
-#include "derived/TarnReportingSegments.h"
+#include "derived/TarnReportingSegmentWalk.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingUtility.h"
 #include "session/TarnReportingSession.h"
@@ -18,8 +18,6 @@ namespace tarn {
 
 namespace {
 
-constexpr std::string_view kModule = TarnReportingSessionInputMessagesWorker::kClassName;
-constexpr std::string_view kOperation = "createInputMessages";
 constexpr double kMaximumPauseSeconds = 2;
 
 enum class Field : std::size_t {
@@ -56,8 +54,33 @@ const Fields::Keys kKeys{plist::Key("tarnreporting_timestamp"),
 const std::array<plist::Key, 2> kKeysToCombine{plist::Key("spatial-audio-accessory-feature"),
                                                plist::Key("spatializationEnabled")};
 
+class InputRules {
+ public:
+  using Field = tarn::Field;
+
+  static constexpr TarnReportingLogger kLog{TarnReportingSessionCategory,
+                                            TarnReportingSessionInputMessagesWorker::kClassName};
+  static constexpr std::string_view kOperation = "createInputMessages";
+  static constexpr LogText kLength{
+      "runningTime { func=%s, runningTime=%f, tarnTimestamp=%@, tarnTimestamp_double=%f, "
+      "startTarnTimestamp=%@, startTarnTimestamp_double=%f }"};
+  static constexpr LogText kAdded{"added input message { func=%s, action=add, count=%lu }"};
+  static constexpr LogText kSkipped{"skipped input message, too short { func=%s, action=skip, count=%lu }"};
+
+  static const Fields::Keys& keys() { return kKeys; }
+  static Fields initialState(const TarnReportingSessionPreviousValues& previousValues);
+  bool cuts(const Fields& message, const Fields& state);
+  static bool suffices(const Fields&) { return true; }
+  std::shared_ptr<TarnReportingSessionMessage> makeMessage(const TarnReportingSegment<Field>& segment);
+
+ private:
+  std::string joinedCodecs() const;
+
+  std::set<std::string> codecs_;  // "codec:rate", since the last message that came out
+};
+
 // The format's two values and the codec's rate, which nothing here looks at again, are left out of the state.
-Fields initialState(const TarnReportingSessionPreviousValues& previousValues) {
+Fields InputRules::initialState(const TarnReportingSessionPreviousValues& previousValues) {
   Fields state;
   for (const Field field : {Field::ActiveDevices, Field::OperationMode, Field::InputPort, Field::Vocoder}) {
     state[field] = "unknown";
@@ -66,114 +89,40 @@ Fields initialState(const TarnReportingSessionPreviousValues& previousValues) {
   return state;
 }
 
-class InputWalk {
- public:
-  InputWalk(const TarnReportingSessionPreviousValues& previousValues, std::string_view process,
-            double minimumRunningtime)
-      : process_(process), minimumRunningtime_(minimumRunningtime), state_(initialState(previousValues)) {}
-  void take(const plist::Dictionary& payload);
-  TarnReportingSessionMessages finish();
-
- private:
+// Notes the codec, too: each that was seen while input ran is told.
+bool InputRules::cuts(const Fields& message, const Fields& state) {
   // For a field that the state holds from the beginning on.
-  bool differsFromState(const Fields& message, Field field) const;
-  void noteCodec(const Fields& message);
-  void endSegment(const plist::ValueView& time);
-  std::shared_ptr<TarnReportingSessionMessage> makeMessage(double seconds) const;
-  std::string joinedCodecs() const;
-
-  const std::string_view process_;
-  const double minimumRunningtime_;
-  TarnReportingMessageFieldReader<Field> reader_{kKeys};
-  Fields state_;
-  bool running_ = false;
-  TarnReportingSegmentClock clock_;
-  std::set<std::string> codecs_;  // "codec:rate", since the last message that came out
-  TarnReportingSessionMessages derived_;
-};
-
-void InputWalk::take(const plist::Dictionary& payload) {
-  const Fields message = reader_.read(payload);
-  const plist::ValueView& time = message[Field::Timestamp];
-  const bool wasRunning = state_[Field::Running].asBool();
-  const bool hasEnd = message[Field::Duration].present();
-  bool changed = hasEnd;
-  if (const plist::ValueView& running = message[Field::Running]) {
-    running_ = running.asBool();
-    if (running_ && !wasRunning) {
-      clock_.startAt(time);
+  const auto changes = [&](Field field) { return message[field].present() && !(message[field] == state[field]); };
+  if (changes(Field::Vocoder)) {
+    const std::string rate = message[Field::VocoderRate].asText();
+    if (!rate.starts_with("0.")) {
+      codecs_.insert(message[Field::Vocoder].asText() + ":" + rate);
     }
-    changed = changed || !running_;
-  } else {
-    running_ = running_ && !hasEnd;
   }
-  if (running_) {
-    changed = changed || differsFromState(message, Field::ActiveDevices);
-    noteCodec(message);
-  }
-  if (wasRunning && changed) {
-    endSegment(time);
-  }
-  if (!running_) {
-    clock_.clear();
-  }
-  state_.merge(message);
+  return changes(Field::ActiveDevices);
 }
 
-bool InputWalk::differsFromState(const Fields& message, Field field) const {
-  return message[field].present() && !(message[field] == state_[field]);
-}
-
-void InputWalk::noteCodec(const Fields& message) {
-  if (!differsFromState(message, Field::Vocoder)) {
-    return;
-  }
-  const std::string rate = message[Field::VocoderRate].asText();
-  if (!rate.starts_with("0.")) {
-    codecs_.insert(message[Field::Vocoder].asText() + ":" + rate);
-  }
-}
-
-// Ends the segment at `time`, where the next one begins. The state is still that of the segment.
-void InputWalk::endSegment(const plist::ValueView& time) {
-  const double seconds = clock_.secondsUntil(time);
-  TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, kModule,
-                   "runningTime { func=%s, runningTime=%f, tarnTimestamp=%@, tarnTimestamp_double=%f, "
-                   "startTarnTimestamp=%@, startTarnTimestamp_double=%f }",
-                   kOperation, seconds, time, time.asDouble(), clock_.start(), clock_.start().asDouble());
-  if (time.present() && clock_.started() && seconds > minimumRunningtime_ && !process_.empty()) {
-    derived_.push_back(makeMessage(seconds));
-    codecs_.clear();
-    TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, kModule,
-                     "added input message { func=%s, action=add, count=%lu }", kOperation, derived_.size());
-  } else {
-    TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, kModule,
-                     "skipped input message, too short { func=%s, action=skip, count=%lu }", kOperation,
-                     derived_.size());
-  }
-  clock_.startAt(time);
-}
-
-std::shared_ptr<TarnReportingSessionMessage> InputWalk::makeMessage(double seconds) const {
-  const std::string lengthLabel = TarnReportingSegmentLengthLabel(seconds);
+std::shared_ptr<TarnReportingSessionMessage> InputRules::makeMessage(const TarnReportingSegment<Field>& segment) {
+  const std::string lengthLabel = TarnReportingSegmentLengthLabel(segment.seconds);
   const std::string codecs = joinedCodecs();
   std::vector<plist::Dictionary::Entry> payload{
-      {keys::kHostApplicationDisplayID, process_},
-      {kRunningSeconds, static_cast<float>(seconds)},
+      {keys::kHostApplicationDisplayID, segment.process},
+      {kRunningSeconds, static_cast<float>(segment.seconds)},
       {kRunningSecondsLabel, lengthLabel},
-      {kTarnReportingMessageIndex, derived_.size() + 1},
-      {kOperationMode, state_[Field::OperationMode]},
-      {kInputPort, state_[Field::InputPort]},
-      {kActiveDevices, state_[Field::ActiveDevices]},
+      {kTarnReportingMessageIndex, segment.index},
+      {kOperationMode, segment.state[Field::OperationMode]},
+      {kInputPort, segment.state[Field::InputPort]},
+      {kActiveDevices, segment.state[Field::ActiveDevices]},
   };
   if (!codecs_.empty()) {
     payload.push_back({kVocoders, codecs});
   }
+  codecs_.clear();
   return std::make_shared<TarnReportingSessionMessage>(plist::Dictionary::fromEntries(payload),
                                                        AudioEventCategory::Input, AudioEventType::Summary);
 }
 
-std::string InputWalk::joinedCodecs() const {
+std::string InputRules::joinedCodecs() const {
   std::string joined;
   for (const std::string& codec : codecs_) {
     joined += (joined.empty() ? "" : ",") + codec;
@@ -181,23 +130,19 @@ std::string InputWalk::joinedCodecs() const {
   return joined;
 }
 
-TarnReportingSessionMessages InputWalk::finish() {
-  TarnReportingNumberMessages(derived_);
-  TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, kModule,
-                   "returning input messages { func=%s, action=return, count=%lu }", kOperation, derived_.size());
-  return std::move(derived_);
-}
-
 }  // namespace
 
 TarnReportingSessionMessages TarnReportingSessionInputMessagesWorker::createInputMessages(
     const TarnReportingSessionMessages& messages, const TarnReportingSessionPreviousValues& previousValues,
     std::string_view process, double minimumRunningtime) {
-  TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, kModule, "entering createInputMessages %s",
-                   kOperation);
+  InputRules::kLog(LogLevel::Debug, "entering createInputMessages %s", InputRules::kOperation);
   const TarnReportingSessionMessages combined =
       TarnReportingSessionWorkerUtility::combineRapidMessages(messages, kKeysToCombine, kMaximumPauseSeconds);
-  return TarnReportingDerivedMessages(combined, InputWalk(previousValues, process, minimumRunningtime));
+  TarnReportingSessionMessages derived = TarnReportingDerivedMessages(
+      combined, TarnReportingSegmentWalk<InputRules>(previousValues, process, minimumRunningtime));
+  InputRules::kLog(LogLevel::Debug, "returning input messages { func=%s, action=return, count=%lu }",
+                   InputRules::kOperation, derived.size());
+  return derived;
 }
 
 std::unique_ptr<TarnReportingSessionInputMessagesWorker> TarnReportingSessionInputMessagesWorker::initWithSession(
@@ -206,12 +151,13 @@ std::unique_ptr<TarnReportingSessionInputMessagesWorker> TarnReportingSessionInp
 }
 
 void TarnReportingSessionInputMessagesWorker::stop() {
-  TarnReportingSendDerivedMessages(
-      session(), kModule, "sending input summary event for reporter %lli", [](const TarnReportingSession& owner) {
-        return createInputMessages(owner.messages(), owner.previousValues(),
-                                   TarnReportingUtilityRetrieveAppName(owner.configuration()),
-                                   TarnReportingUtilityVolumeMinimumPlayingTime(owner.serviceType()));
-      });
+  TarnReportingSendDerivedMessages(session(), InputRules::kLog, "sending input summary event for reporter %lli",
+                                   [](const TarnReportingSession& owner) {
+                                     return createInputMessages(
+                                         owner.messages(), owner.previousValues(),
+                                         TarnReportingUtilityRetrieveAppName(owner.configuration()),
+                                         TarnReportingUtilityVolumeMinimumPlayingTime(owner.serviceType()));
+                                   });
 }
 
 }  // namespace tarn

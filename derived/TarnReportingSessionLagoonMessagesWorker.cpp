@@ -17,7 +17,7 @@ using Worker = TarnReportingSessionLagoonMessagesWorker;
 using Field = Worker::Field;
 using Fields = Worker::Fields;
 
-constexpr std::string_view kModule = Worker::kClassName;
+constexpr TarnReportingLogger kLog{TarnReportingSessionCategory, Worker::kClassName};
 constexpr std::string_view kOperation = "createLagoonMessages";
 
 const plist::Key kSelectedFormat("session_selected_format");
@@ -112,19 +112,18 @@ void LagoonWalk::take(const plist::Dictionary& payload) {
 // the segment.
 void LagoonWalk::endSegment(const plist::ValueView& time) {
   const double seconds = clock_.secondsUntil(time);
-  TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, kModule,
-                   "playingTime { func=%s, playingTime=%f, tarnTimestamp=%@, tarnTimestamp_double=%f, "
-                   "startTarnTimestamp=%@, startTarnTimestamp_double=%f }",
-                   kOperation, seconds, time, time.asDouble(), clock_.start(), clock_.start().asDouble());
+  kLog(LogLevel::Debug,
+       "playingTime { func=%s, playingTime=%f, tarnTimestamp=%@, tarnTimestamp_double=%f, "
+       "startTarnTimestamp=%@, startTarnTimestamp_double=%f }",
+       kOperation, seconds, time, time.asDouble(), clock_.start(), clock_.start().asDouble());
   if (seconds > minimumPlaytime_ && isInGroup(state_[Field::GroupSession])) {
     derived_.push_back(makeMessage(seconds));
-    TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, kModule,
-                     "added lagoon message { func=%s, action=add, count=%lu }", kOperation, derived_.size());
+    kLog(LogLevel::Debug, "added lagoon message { func=%s, action=add, count=%lu }", kOperation, derived_.size());
   } else {
-    TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, kModule,
-                     "skipped lagoon message, too short or not actually an lagoon session { func=%s, action=skip, "
-                     "count=%lu }",
-                     kOperation, derived_.size());
+    kLog(LogLevel::Debug,
+         "skipped lagoon message, too short or not actually an lagoon session { func=%s, action=skip, "
+         "count=%lu }",
+         kOperation, derived_.size());
   }
   if (inGroup_ && running_) {
     clock_.startAt(time);
@@ -198,8 +197,7 @@ plist::ValueView TarnReportingSessionLagoonMessagesWorker::coalesceKey(
 TarnReportingSessionMessages TarnReportingSessionLagoonMessagesWorker::createLagoonMessages(
     const TarnReportingSessionMessages& messages, const TarnReportingSessionPreviousValues& previousValues,
     double minimumPlaytime) {
-  TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, kModule, "entering createLagoonMessages %s",
-                   kOperation);
+  kLog(LogLevel::Debug, "entering createLagoonMessages %s", kOperation);
   return TarnReportingDerivedMessages(messages, LagoonWalk(previousValues, minimumPlaytime));
 }
 
@@ -210,7 +208,7 @@ std::unique_ptr<TarnReportingSessionLagoonMessagesWorker> TarnReportingSessionLa
 
 void TarnReportingSessionLagoonMessagesWorker::stop() {
   TarnReportingSendDerivedMessages(
-      session(), kModule, "sending lagoon event for reporter %lli", [](const TarnReportingSession& owner) {
+      session(), kLog, "sending lagoon event for reporter %lli", [](const TarnReportingSession& owner) {
         return createLagoonMessages(owner.messages(), owner.previousValues(),
                                     TarnReportingUtilityVolumeMinimumPlayingTime(owner.serviceType()));
       });

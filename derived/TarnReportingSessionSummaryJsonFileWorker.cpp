@@ -21,18 +21,13 @@ namespace tarn {
 
 namespace {
 
-constexpr std::string_view kModule = "TarnReportingSessionSummaryJsonFileWorker";
+constexpr TarnReportingLogger kLog{TarnReportingSessionCategory, "TarnReportingSessionSummaryJsonFileWorker"};
 constexpr std::uint32_t kDirectoryPermissions = 0777;  // less the process's mask
 // Files of one session ID, application and service that were begun in the same second; one more is an error.
 constexpr int kMostFilesOfOneName = 10000;
 
 // How many messages of a name, which tells category and type, are in the file.
 using Counts = std::unordered_map<std::string, std::uint64_t>;
-
-template <class... Arguments>
-void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
-  TarnReportingLog(TarnReportingSessionCategory(), level, kModule, text, arguments...);
-}
 
 // The file's path without ".json".
 std::string pathStem(const std::string& directory, const TarnReportingSession& session) {
@@ -76,7 +71,7 @@ bool appendObject(std::string& text, const TarnReportingSessionMessage& message,
   plist::appendJsonText(text, name + "_" + std::to_string(count + 1));
   text += ": ";
   if (const auto misfit = plist::appendPrettyJson(text, message.message(), 1)) {
-    log(LogLevel::Error, "dataWithJSONObject: %@", *misfit);
+    kLog(LogLevel::Error, "dataWithJSONObject: %@", *misfit);
     return false;
   }
   text += "\n}";
@@ -132,7 +127,7 @@ bool TarnReportingSessionSummaryJsonFileWorker::openFile(const TarnReportingSess
   platform::FileSystem& files = TarnReportingFacilities().fileSystem;
   const std::string directory = TarnReportingLogsDirectory();
   if (const auto error = files.createDirectories(directory, kDirectoryPermissions)) {
-    log(LogLevel::Error, "can't create logging directory at %@: %@", directory, error->text);
+    kLog(LogLevel::Error, "can't create logging directory at %@: %@", directory, error->text);
   }
   std::string path;
   platform::MaybeError error = createFile(pathStem(directory, session), path);
@@ -142,12 +137,12 @@ bool TarnReportingSessionSummaryJsonFileWorker::openFile(const TarnReportingSess
     reportFileHandle_ = std::move(opened.value);
   }
   if (error) {
-    log(LogLevel::Error, "SummaryJsonFileWorker failed to open file. action=open file=%@ error=\"%@\"", path,
-        error->text);
+    kLog(LogLevel::Error, "SummaryJsonFileWorker failed to open file. action=open file=%@ error=\"%@\"", path,
+         error->text);
     setStarted(false);
     return false;
   }
-  log(LogLevel::Info, "SummaryJsonFileWorker opened file. action=open file=%@", path);
+  kLog(LogLevel::Info, "SummaryJsonFileWorker opened file. action=open file=%@", path);
   reportPath_ = std::move(path);
   setStarted(true);
   return writeLine("[");
@@ -157,8 +152,8 @@ bool TarnReportingSessionSummaryJsonFileWorker::writeLine(std::string line) {
   line += '\n';
   const platform::MaybeError error = reportFileHandle_->write(line);
   if (error) {
-    log(LogLevel::Error, "SummaryJsonFileWorker failed to write line. action=writeline file=%@ error=\"%@\"",
-        reportPath_, error->text);
+    kLog(LogLevel::Error, "SummaryJsonFileWorker failed to write line. action=writeline file=%@ error=\"%@\"",
+         reportPath_, error->text);
   }
   writeFailed_ = error.has_value();
   return !writeFailed_;
@@ -172,10 +167,10 @@ void TarnReportingSessionSummaryJsonFileWorker::closeFile() {
     writeLine("]");
   }
   if (const auto error = reportFileHandle_->close()) {
-    log(LogLevel::Error, "SummaryJsonFileWorker failed to closed file. action=close file=%@ error=\"%@\"", reportPath_,
-        error->text);
+    kLog(LogLevel::Error, "SummaryJsonFileWorker failed to closed file. action=close file=%@ error=\"%@\"", reportPath_,
+         error->text);
   } else {
-    log(LogLevel::Info, "SummaryJsonFileWorker closed file. action=close file=%@", reportPath_);
+    kLog(LogLevel::Info, "SummaryJsonFileWorker closed file. action=close file=%@", reportPath_);
   }
   reportFileHandle_.reset();
   reportPath_.clear();

@@ -5,7 +5,7 @@
 
 #include "derived/TarnReportingDerivation.h"
 #include "derived/TarnReportingMessageFields.h"
-#include "derived/TarnReportingSegments.h"
+#include "derived/TarnReportingSegmentWalk.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingUtility.h"
 #include "session/TarnReportingSession.h"
@@ -16,8 +16,6 @@ namespace tarn {
 
 namespace {
 
-constexpr std::string_view kModule = TarnReportingSessionVolumeMessagesWorker::kClassName;
-constexpr std::string_view kOperation = "createVolumeMessages";
 constexpr double kMaximumPauseSeconds = 5;
 
 enum class Field : std::size_t {
@@ -63,7 +61,26 @@ const Fields::Keys kKeys{plist::Key("tarnreporting_timestamp"),
 
 const std::array<plist::Key, 2> kKeysToCombine{kSpatialAccessory, kSpatialization};
 
-Fields initialState(const TarnReportingSessionPreviousValues& previousValues) {
+struct VolumeRules {
+  using Field = tarn::Field;
+
+  static constexpr TarnReportingLogger kLog{TarnReportingSessionCategory,
+                                            TarnReportingSessionVolumeMessagesWorker::kClassName};
+  static constexpr std::string_view kOperation = "createVolumeMessages";
+  static constexpr LogText kLength{
+      "playingTime { func=%s, playingTime=%f, tarnTimestamp=%@, tarnTimestamp_double=%f, "
+      "startTarnTimestamp=%@, startTarnTimestamp_double=%f }"};
+  static constexpr LogText kAdded{"added volume message { func=%s, action=add, count=%lu }"};
+  static constexpr LogText kSkipped{"skipped volume message, too short { func=%s, action=skip, count=%lu }"};
+
+  static const Fields::Keys& keys() { return kKeys; }
+  static Fields initialState(const TarnReportingSessionPreviousValues& previousValues);
+  static bool cuts(const Fields& message, const Fields& state);
+  static bool suffices(const Fields& state) { return state[Field::Volume].present(); }
+  static std::shared_ptr<TarnReportingSessionMessage> makeMessage(const TarnReportingSegment<Field>& segment);
+};
+
+Fields VolumeRules::initialState(const TarnReportingSessionPreviousValues& previousValues) {
   Fields state;
   state[Field::SelectedFormat] = "unknown";
   state[Field::ActiveDevices] = "unknown";
@@ -78,55 +95,9 @@ Fields initialState(const TarnReportingSessionPreviousValues& previousValues) {
   return state;
 }
 
-class VolumeWalk {
- public:
-  VolumeWalk(const TarnReportingSessionPreviousValues& previousValues, std::string_view process, double minimumPlaytime)
-      : process_(process), minimumPlaytime_(minimumPlaytime), state_(initialState(previousValues)) {}
-  void take(const plist::Dictionary& payload);
-  TarnReportingSessionMessages finish();
-
- private:
-  bool outputChanges(const Fields& message) const;
-  void endSegment(const plist::ValueView& time);
-  std::shared_ptr<TarnReportingSessionMessage> makeMessage(double seconds) const;
-
-  const std::string_view process_;
-  const double minimumPlaytime_;
-  TarnReportingMessageFieldReader<Field> reader_{kKeys};
-  Fields state_;
-  bool running_ = false;
-  TarnReportingSegmentClock clock_;
-  TarnReportingSessionMessages derived_;
-};
-
-void VolumeWalk::take(const plist::Dictionary& payload) {
-  const Fields message = reader_.read(payload);
-  const plist::ValueView& time = message[Field::Timestamp];
-  const bool wasRunning = state_[Field::Running].asBool();
-  const bool hasEnd = message[Field::Duration].present();
-  bool changed = hasEnd;
-  if (const plist::ValueView& running = message[Field::Running]) {
-    running_ = running.asBool();
-    if (running_ && !wasRunning) {
-      clock_.startAt(time);
-    }
-    changed = changed || !running_;
-  } else {
-    running_ = running_ && !hasEnd;
-  }
-  changed = changed || (running_ && outputChanges(message));
-  if (wasRunning && changed) {
-    endSegment(time);
-  }
-  if (!running_) {
-    clock_.clear();
-  }
-  state_.merge(message);
-}
-
-bool VolumeWalk::outputChanges(const Fields& message) const {
+bool VolumeRules::cuts(const Fields& message, const Fields& state) {
   const auto changes = [&](Field field, bool (*differ)(const plist::ValueView&, const plist::ValueView&)) {
-    return message[field].present() && state_[field].present() && differ(state_[field], message[field]);
+    return message[field].present() && state[field].present() && differ(state[field], message[field]);
   };
   return changes(Field::SelectedFormat, TarnReportingTextsDiffer) ||
          changes(Field::ActiveDevices, TarnReportingTextsDiffer) ||
@@ -134,51 +105,27 @@ bool VolumeWalk::outputChanges(const Fields& message) const {
          changes(Field::RingerState, TarnReportingNumbersDiffer) || changes(Field::Volume, TarnReportingNumbersDiffer);
 }
 
-// Ends the segment at `time`, where the next one begins. The state is still that of the segment.
-void VolumeWalk::endSegment(const plist::ValueView& time) {
-  const double seconds = clock_.secondsUntil(time);
-  TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, kModule,
-                   "playingTime { func=%s, playingTime=%f, tarnTimestamp=%@, tarnTimestamp_double=%f, "
-                   "startTarnTimestamp=%@, startTarnTimestamp_double=%f }",
-                   kOperation, seconds, time, time.asDouble(), clock_.start(), clock_.start().asDouble());
-  if (time.present() && clock_.started() && seconds > minimumPlaytime_ && state_[Field::Volume].present() &&
-      !process_.empty()) {
-    derived_.push_back(makeMessage(seconds));
-    TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, kModule,
-                     "added volume message { func=%s, action=add, count=%lu }", kOperation, derived_.size());
-  } else {
-    TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, kModule,
-                     "skipped volume message, too short { func=%s, action=skip, count=%lu }", kOperation,
-                     derived_.size());
-  }
-  clock_.startAt(time);
-}
-
-std::shared_ptr<TarnReportingSessionMessage> VolumeWalk::makeMessage(double seconds) const {
-  const std::string volumeLabel = TarnReportingVolumeLabel(state_[Field::Volume].asDouble());
-  const std::string lengthLabel = TarnReportingSegmentLengthLabel(seconds);
+std::shared_ptr<TarnReportingSessionMessage> VolumeRules::makeMessage(const TarnReportingSegment<Field>& segment) {
+  const Fields& state = segment.state;
+  const std::string volumeLabel = TarnReportingVolumeLabel(state[Field::Volume].asDouble());
+  const std::string lengthLabel = TarnReportingSegmentLengthLabel(segment.seconds);
   const std::array<plist::Dictionary::Entry, 13> payload{{
-      {kSelectedFormat, state_[Field::SelectedFormat]},
-      {kFormatID, state_[Field::FormatID]},
-      {kActiveDevices, state_[Field::ActiveDevices]},
-      {keys::kHostApplicationDisplayID, process_},
-      {kVolume, state_[Field::Volume]},
+      {kSelectedFormat, state[Field::SelectedFormat]},
+      {kFormatID, state[Field::FormatID]},
+      {kActiveDevices, state[Field::ActiveDevices]},
+      {keys::kHostApplicationDisplayID, segment.process},
+      {kVolume, state[Field::Volume]},
       {kVolumeLabel, volumeLabel},
-      {kPlaySeconds, static_cast<float>(seconds)},
-      {kSpatialAccessory, state_[Field::SpatialAccessory]},
-      {kSpatialization, state_[Field::Spatialization]},
-      {kRingerState, state_[Field::RingerState]},
-      {kChannels, state_[Field::Channels]},
+      {kPlaySeconds, static_cast<float>(segment.seconds)},
+      {kSpatialAccessory, state[Field::SpatialAccessory]},
+      {kSpatialization, state[Field::Spatialization]},
+      {kRingerState, state[Field::RingerState]},
+      {kChannels, state[Field::Channels]},
       {kPlaySecondsLabel, lengthLabel},
-      {kTarnReportingMessageIndex, derived_.size() + 1},
+      {kTarnReportingMessageIndex, segment.index},
   }};
   return std::make_shared<TarnReportingSessionMessage>(plist::Dictionary::fromEntries(payload),
                                                        AudioEventCategory::Volume, AudioEventType::Summary);
-}
-
-TarnReportingSessionMessages VolumeWalk::finish() {
-  TarnReportingNumberMessages(derived_);
-  return std::move(derived_);
 }
 
 }  // namespace
@@ -186,11 +133,11 @@ TarnReportingSessionMessages VolumeWalk::finish() {
 TarnReportingSessionMessages TarnReportingSessionVolumeMessagesWorker::createVolumeMessages(
     const TarnReportingSessionMessages& messages, const TarnReportingSessionPreviousValues& previousValues,
     std::string_view process, double minimumPlaytime) {
-  TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, kModule, "entering createVolumeMessages %s",
-                   kOperation);
+  VolumeRules::kLog(LogLevel::Debug, "entering createVolumeMessages %s", VolumeRules::kOperation);
   const TarnReportingSessionMessages combined =
       TarnReportingSessionWorkerUtility::combineRapidMessages(messages, kKeysToCombine, kMaximumPauseSeconds);
-  return TarnReportingDerivedMessages(combined, VolumeWalk(previousValues, process, minimumPlaytime));
+  return TarnReportingDerivedMessages(combined,
+                                      TarnReportingSegmentWalk<VolumeRules>(previousValues, process, minimumPlaytime));
 }
 
 std::unique_ptr<TarnReportingSessionVolumeMessagesWorker> TarnReportingSessionVolumeMessagesWorker::initWithSession(
@@ -200,7 +147,7 @@ std::unique_ptr<TarnReportingSessionVolumeMessagesWorker> TarnReportingSessionVo
 
 void TarnReportingSessionVolumeMessagesWorker::stop() {
   TarnReportingSendDerivedMessages(
-      session(), kModule, "sending volume event for reporter %lli", [](const TarnReportingSession& owner) {
+      session(), VolumeRules::kLog, "sending volume event for reporter %lli", [](const TarnReportingSession& owner) {
         return createVolumeMessages(owner.messages(), owner.previousValues(),
                                     TarnReportingUtilityRetrieveAppName(owner.configuration()),
                                     TarnReportingUtilityVolumeMinimumPlayingTime(owner.serviceType()));

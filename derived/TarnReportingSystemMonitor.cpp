@@ -17,7 +17,7 @@ namespace tarn {
 
 namespace {
 
-constexpr std::string_view kModule = "TarnReportingSystemMonitor";
+constexpr TarnReportingLogger kLog{TarnReportingServiceDelegateCategory, "TarnReportingSystemMonitor"};
 constexpr std::string_view kServiceSuite = "sys.oxbow.tarnkit";
 constexpr std::string_view kUser = "mobile";
 
@@ -159,8 +159,7 @@ TarnReportingSystemMonitor::TarnReportingSystemMonitor(FromInit, std::shared_ptr
       features_(makeFeatures()) {}
 
 void TarnReportingSystemMonitor::populateInitialValues() {
-  TarnReportingLog(TarnReportingServiceDelegateCategory(), LogLevel::Info, kModule, "populateInitialValues %@",
-                   [this] { return features(); });
+  kLog(LogLevel::Info, "populateInitialValues %@", [this] { return features(); });
   const std::lock_guard guard(*systemMonitorDictionary_);
   for (const auto& [name, description] : features_) {
     if (const plist::Dictionary state = getFeatureState(name.text()); !state.empty()) {
@@ -170,8 +169,7 @@ void TarnReportingSystemMonitor::populateInitialValues() {
 }
 
 void TarnReportingSystemMonitor::listenForFeatureStateChanges() {
-  TarnReportingLog(TarnReportingServiceDelegateCategory(), LogLevel::Info, kModule, "listening for features %@",
-                   [this] { return features(); });
+  kLog(LogLevel::Info, "listening for features %@", [this] { return features(); });
   const plist::Dictionary features = this->features();
   for (const auto& [name, description] : features) {
     listenForFeature(name, description.dictionary());
@@ -192,13 +190,11 @@ void TarnReportingSystemMonitor::listenForFeature(const plist::Key& name, const 
     registered.set(kNotifyToken, registration.token);
     features_.set(name, registered);
   }
-  TarnReportingLog(TarnReportingServiceDelegateCategory(), LogLevel::Default, kModule,
-                   "notify setup result %i token %i", registration.status, registration.token);
+  kLog(LogLevel::Default, "notify setup result %i token %i", registration.status, registration.token);
 }
 
 void TarnReportingSystemMonitor::featureChanged(const plist::Key& name, std::int32_t token) {
-  TarnReportingLog(TarnReportingServiceDelegateCategory(), LogLevel::Info, kModule,
-                   "feature changes featureName=%@ token=%i", name.text(), token);
+  kLog(LogLevel::Info, "feature changes featureName=%@ token=%i", name.text(), token);
   {
     const std::lock_guard guard(*systemMonitorDictionary_);
     const plist::Dictionary state = getFeatureState(name.text());
@@ -206,14 +202,13 @@ void TarnReportingSystemMonitor::featureChanged(const plist::Key& name, std::int
       return;
     }
     systemMonitorDictionary_->store(name, state);
-    TarnReportingLog(TarnReportingServiceDelegateCategory(), LogLevel::Debug, kModule, "Updating value featureName=%@",
-                     name.text());
+    kLog(LogLevel::Debug, "Updating value featureName=%@", name.text());
   }
   systemMonitorDictionary_->notifyObservers(name);
 }
 
 plist::Dictionary TarnReportingSystemMonitor::getFeatureState(std::string_view name) const {
-  TarnReportingLog(TarnReportingServiceDelegateCategory(), LogLevel::Default, kModule, "getting feature %@", name);
+  kLog(LogLevel::Default, "getting feature %@", name);
   const plist::Dictionary features = this->features();
   const plist::ValueView description = features.get(name);
   if (description.kind() != plist::Kind::Dictionary) {

@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <limits>
-#include <mutex>
 #include <optional>
 #include <utility>
 
@@ -24,7 +23,7 @@ namespace tarn {
 
 namespace {
 
-constexpr std::string_view kModule = "TarnReportingSessionDPWorker";
+constexpr TarnReportingLogger kLog{TarnReportingDPLogCategory, "TarnReportingSessionDPWorker"};
 constexpr std::string_view kSubsystem = "sys.oxbow.tarnkit";
 constexpr std::string_view kReason = "AudioOverloads";
 constexpr std::string_view kDroppedNotification = "sys.oxbow.tarnkit.dropped-gyre";
@@ -37,11 +36,6 @@ struct RunTimeSettings {
   std::int32_t minimumIOCycle = 0;
   double waitMicroseconds = 0;
 };
-
-template <class... Arguments>
-void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
-  TarnReportingLog(TarnReportingDPLogCategory(), level, kModule, text, arguments...);
-}
 
 // Held to the range of 32 bits.
 std::int32_t asInt32(const plist::ValueView& value) {
@@ -62,7 +56,7 @@ std::int32_t ioCycle(const plist::Dictionary& payload) {
 plist::Value loggedSetting(std::string_view key) {
   plist::Value value = TarnReportingSessionDPWorker::getUserDefaults().value(key);
   if (value.present()) {
-    log(LogLevel::Debug, "Value of %@ is %@", key, value);
+    kLog(LogLevel::Debug, "Value of %@ is %@", key, value);
   }
   return value;
 }
@@ -80,16 +74,8 @@ std::chrono::nanoseconds heldWait(double microseconds) {
 // Blocks the queue. A condition that nobody signals, and not a plain sleep, since the platform takes a wait on it for a
 // deliberate one.
 void waitFor(std::chrono::nanoseconds time) {
-  if (time <= std::chrono::nanoseconds::zero()) {
-    return;
-  }
-  const platform::Facilities& facilities = TarnReportingFacilities();
-  const auto condition = facilities.conditions.makeCondition();
-  const std::lock_guard lock(*condition);
-  const auto end = facilities.clock.monotonic() + time;
-  // A wake before the time is up is nobody's signal.
-  while (time > std::chrono::nanoseconds::zero() && condition->waitFor(time)) {
-    time = end - facilities.clock.monotonic();
+  if (time > std::chrono::nanoseconds::zero()) {
+    static_cast<void>(TarnReportingUtilityWait(*TarnReportingFacilities().conditions.makeCondition(), time, false));
   }
 }
 
@@ -132,7 +118,7 @@ bool TarnReportingSessionDPWorker::interestedInMessage(const TarnReportingSessio
   if (message.type() != AudioEventType::Error || message.category() != AudioEventCategory::IO) {
     return false;
   }
-  log(LogLevel::Info, "Interested in overload");
+  kLog(LogLevel::Info, "Interested in overload");
   return true;
 }
 
@@ -146,7 +132,7 @@ bool TarnReportingSessionDPWorker::meetsConditions(const plist::Dictionary& payl
 void TarnReportingSessionDPWorker::dropGyre(const plist::Dictionary& payload) {
   const platform::Facilities& facilities = TarnReportingFacilities();
   waitFor(heldWait(ProcessState::of<RunTimeSettings>()->waitMicroseconds));
-  log(LogLevel::Info, "Dropping gyre %@", payload);
+  kLog(LogLevel::Info, "Dropping gyre %@", payload);
   if (facilities.gyre != nullptr) {
     facilities.gyre->requestGyre({.subsystem = std::string(kSubsystem),
                                   .reason = std::string(kReason),
@@ -156,7 +142,7 @@ void TarnReportingSessionDPWorker::dropGyre(const plist::Dictionary& payload) {
   }
   // The platform logs a post that fails; the trace is asked for already.
   static_cast<void>(facilities.notifications.post(kDroppedNotification, std::nullopt));
-  log(LogLevel::Info, "Dropped gyre");
+  kLog(LogLevel::Info, "Dropped gyre");
 }
 
 void TarnReportingSessionDPWorker::handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) {
@@ -172,7 +158,7 @@ void TarnReportingSessionDPWorker::handleMessage(const std::shared_ptr<TarnRepor
     }
   }
   // Nearly every message comes here, so what the line says is worked out only when it is written.
-  log(
+  kLog(
       LogLevel::Debug, "Did not drop gyre, right conditions not met: buffer size : %d, time diff : %f, io cycle: %d",
       [&payload] { return bufferFrameSize(payload); },
       [&clock, &now, this] { return now.value_or(clock.epochSeconds()) - lastMessageTime_; },

@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <array>
-#include <mutex>
 #include <string>
 #include <utility>
 
@@ -25,6 +24,8 @@ namespace {
 
 using Worker = TarnReportingSessionMemoryLogWorker;
 
+// These lines are read by programs that look for the tag at their beginning: no module stands before it.
+constexpr TarnReportingLogger kLog{TarnReportingSessionCategory, {}};
 constexpr std::string_view kTag = "wiredlog:";
 constexpr std::size_t kLineBytes = 2047;
 constexpr std::size_t kBlockBytes = 512;
@@ -53,12 +54,6 @@ struct Tool {
 constexpr Tool kResources{"/usr/local/bin/restop", "sys.oxbow.tarnkit.reporting.memorylog.resources", isResourceLine};
 constexpr Tool kZones{"/usr/bin/zonetally -l", "sys.oxbow.tarnkit.reporting.memorylog.zones",
                       [](std::string_view) { return true; }};
-
-// These lines are read by programs that look for the tag at their beginning: no module stands before it.
-template <class... Arguments>
-void log(const LogText& text, const Arguments&... arguments) {
-  TarnReportingLogPlain(TarnReportingSessionCategory(), LogLevel::Error, text, arguments...);
-}
 
 struct Output {
   std::string kept;
@@ -91,30 +86,30 @@ bool wasNotExecuted(const platform::CommandEnd& end) {
 
 // Runs the tool to its end; what it printed, as far as it is wanted.
 std::string runTool(const Tool& tool) {
-  log("%s requesting '%s'", kTag, tool.command);
+  kLog(LogLevel::Error, "%s requesting '%s'", kTag, tool.command);
   const auto started = TarnReportingFacilities().commandRunner.start(tool.command, Worker::kToolTimeLimit);
   if (started.failed()) {
-    log("%s unable to execute '%s'", kTag, tool.command);
+    kLog(LogLevel::Error, "%s unable to execute '%s'", kTag, tool.command);
     return {};
   }
   Output output = readOutput(*started.value, tool);
   const platform::CommandEnd end = started.value->close();
   if (output.none && wasNotExecuted(end)) {
-    log("%s unable to execute '%s'", kTag, tool.command);
+    kLog(LogLevel::Error, "%s unable to execute '%s'", kTag, tool.command);
     return {};
   }
   if (output.cut) {
-    log("%s output of '%s' cut", kTag, tool.command);
+    kLog(LogLevel::Error, "%s output of '%s' cut", kTag, tool.command);
   }
-  log("%s request %s captured", kTag, tool.command);
+  kLog(LogLevel::Error, "%s request %s captured", kTag, tool.command);
   return std::move(output.kept);
 }
 
 // A tool on its way, shared by its thread and the one that waits.
 struct ToolRun {
   const std::shared_ptr<platform::Condition> condition = TarnReportingFacilities().conditions.makeCondition();
-  bool finished = false;  // guarded by the condition, as the text
-  std::string text;
+  bool finished = false;  // guarded by the condition
+  std::string text;       // the tool's until then
 };
 
 std::shared_ptr<ToolRun> startTool(const Tool& tool) {
@@ -122,29 +117,19 @@ std::shared_ptr<ToolRun> startTool(const Tool& tool) {
   TarnReportingFacilities()
       .workQueues.makeSerialQueue(tool.queueName, platform::QualityOfService::UserInitiated)
       ->async([run, &tool] {
-        std::string text = runTool(tool);
-        const std::lock_guard lock(*run->condition);
-        run->text = std::move(text);
-        run->finished = true;
-        run->condition->signal();
+        run->text = runTool(tool);
+        TarnReportingUtilitySignal(*run->condition, run->finished);
       });
   return run;
 }
 
 // Waits until `deadline` on the monotonic clock.
 std::string textOf(ToolRun& run, const Tool& tool, std::chrono::nanoseconds deadline) {
-  const platform::Clock& clock = TarnReportingFacilities().clock;
-  const std::lock_guard lock(*run.condition);
-  for (auto left = deadline - clock.monotonic(); !run.finished && left > std::chrono::nanoseconds::zero();
-       left = deadline - clock.monotonic()) {
-    if (!run.condition->waitFor(left)) {
-      break;
-    }
+  if (!TarnReportingUtilityWait(*run.condition, deadline - TarnReportingFacilities().clock.monotonic(), run.finished)) {
+    kLog(LogLevel::Error, "%s gave up waiting for '%s'", kTag, tool.command);
+    return {};
   }
-  if (!run.finished) {
-    log("%s gave up waiting for '%s'", kTag, tool.command);
-  }
-  return std::move(run.text);
+  return std::move(run.text);  // the tool's thread is through with it
 }
 
 // How long the next block is: it ends with the first line that ends behind the least size.
@@ -169,7 +154,7 @@ std::size_t pieceLength(std::string_view block) {
 void logBlock(std::size_t number, std::string_view block) {
   while (!block.empty()) {
     const std::string_view piece = block.substr(0, pieceLength(block));
-    log("WIRED LOG BLOCK %zu\n%s", number, piece);
+    kLog(LogLevel::Error, "WIRED LOG BLOCK %zu\n%s", number, piece);
     block.remove_prefix(piece.size());
   }
 }

@@ -20,23 +20,18 @@ namespace tarn {
 
 namespace {
 
-constexpr std::string_view kModule = "TarnReportingSessionTattleWorker";
+constexpr TarnReportingLogger kLog{TarnReportingSessionCategory, "TarnReportingSessionTattleWorker"};
 constexpr std::string_view kBackOffKey = "ParleyInvalidXyBackOffSeconds";
 constexpr std::string_view kLastRunKey = "ParleyInvalidXyTatlastRun";
 constexpr std::string_view kDisplayReason = "a Parley spatial positioning error occurred";
 constexpr double kSecondsIgnored = 5.0;
 
-template <class... Arguments>
-void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
-  TarnReportingLog(TarnReportingSessionCategory(), level, kModule, text, arguments...);
-}
-
 // On the prompt service's thread, at any time: the worker may be gone.
 void logCompletion(const platform::MaybeError& error) {
   if (error) {
-    log(LogLevel::Error, "Error creating draft - %@", error->text);
+    kLog(LogLevel::Error, "Error creating draft - %@", error->text);
   } else {
-    log(LogLevel::Info, "Successfully created draft");
+    kLog(LogLevel::Info, "Successfully created draft");
   }
 }
 
@@ -50,7 +45,7 @@ std::unique_ptr<TarnReportingSessionTattleWorker> TarnReportingSessionTattleWork
   }
   const plist::Value backOff = TarnReportingDiagnosticDefaults().value(kBackOffKey);
   if (!backOff.present()) {
-    log(LogLevel::Debug, "%@ default not set. Skipping worker. reporterID=%lli", kBackOffKey, session->reporterID());
+    kLog(LogLevel::Debug, "%@ default not set. Skipping worker. reporterID=%lli", kBackOffKey, session->reporterID());
     return nullptr;
   }
   return std::make_unique<TarnReportingSessionTattleWorker>(session, backOff.view().asDouble());
@@ -65,10 +60,10 @@ bool TarnReportingSessionTattleWorker::hasRunInTimeframe(double backOffSeconds, 
   const double now = TarnReportingFacilities().clock.epochSeconds();
   const plist::Value lastRun = defaults.value(defaultsKey);
   if (lastRun.present() && lastRun.view().asDouble() > now - backOffSeconds) {
-    log(LogLevel::Debug, "Tattle has run. key=%@ lastRun=%@", defaultsKey, lastRun);
+    kLog(LogLevel::Debug, "Tattle has run. key=%@ lastRun=%@", defaultsKey, lastRun);
     return true;
   }
-  log(LogLevel::Debug, "Tattle has not run. key=%@ backoffSeconds=%f", defaultsKey, backOffSeconds);
+  kLog(LogLevel::Debug, "Tattle has not run. key=%@ backoffSeconds=%f", defaultsKey, backOffSeconds);
   // The store logs when it can't write. The prompt is shown all the same, as one in a run is the most there will be.
   static_cast<void>(defaults.setValue(defaultsKey, now));
   return false;
@@ -107,11 +102,11 @@ void TarnReportingSessionTattleWorker::handleMessage(const std::shared_ptr<TarnR
     return;
   }
   if (hasRun_) {
-    log(LogLevel::Debug, "Tattle has already run for ParleyXYerrorMessage reporterID=%lli", owner->reporterID());
+    kLog(LogLevel::Debug, "Tattle has already run for ParleyXYerrorMessage reporterID=%lli", owner->reporterID());
     return;
   }
   hasRun_ = true;
-  log(LogLevel::Default, "Starting tattle for ParleyXYerrorMessage reporterID=%lli", owner->reporterID());
+  kLog(LogLevel::Default, "Starting tattle for ParleyXYerrorMessage reporterID=%lli", owner->reporterID());
   const std::string& name = owner->clientProcessName();
   tattle->createDraft(docketDraftForParleyXYerror(), name.empty() ? std::nullopt : std::optional(name), kDisplayReason,
                       &logCompletion);
@@ -119,7 +114,7 @@ void TarnReportingSessionTattleWorker::handleMessage(const std::shared_ptr<TarnR
 
 void TarnReportingSessionTattleWorker::stop() {
   const std::shared_ptr<TarnReportingSession> owner = session();
-  log(LogLevel::Debug, "Resetting hasRun to false. reporterID=%lli", owner ? owner->reporterID() : 0);
+  kLog(LogLevel::Debug, "Resetting hasRun to false. reporterID=%lli", owner ? owner->reporterID() : 0);
   hasRun_ = false;
 }
 

@@ -16,7 +16,7 @@ namespace tarn {
 
 namespace {
 
-constexpr std::string_view kModule = "TarnReportingSessionWattlogWorker";
+constexpr TarnReportingLogger kLog{TarnReportingWattlogCategory, "TarnReportingSessionWattlogWorker"};
 constexpr std::int32_t kAgentIdentifier = 28;
 // What the application is called when nobody told.
 constexpr std::string_view kUnknownApplication = "Unknown";
@@ -79,13 +79,12 @@ void TarnReportingSessionWattlogWorker::handleEngineOnDurationMessage(
   if (application && *application != kUnknownApplication) {
     payload.set(names.applicationName, *application);
   } else {
-    TarnReportingLog(TarnReportingWattlogCategory(), LogLevel::Error, kModule, "failed to get app name for wattlog");
+    kLog(LogLevel::Error, "failed to get app name for wattlog");
   }
   if (const plist::ValueView timestamp = message.message().get(keys::kTimestamp)) {
     payload.set(names.timestampEnd, timestamp);
   } else {
-    TarnReportingLog(TarnReportingWattlogCategory(), LogLevel::Error, kModule,
-                     "failed to get TarnReporting timestamp for wattlog");
+    kLog(LogLevel::Error, "failed to get TarnReporting timestamp for wattlog");
   }
   post("Loom_Haptics_EngineOnDuration", payload);
 }

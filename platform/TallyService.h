@@ -15,7 +15,8 @@ class TallyService {
   virtual ~TallyService() = default;
   // Whether anybody wants events of this name. Cheap: asked for every message.
   virtual bool eventIsInUse(std::string_view name) = 0;
-  // Hands an event over. The callback is called only when the event is recorded, here or later on another thread.
+  // Hands an event over whose name is in use: the caller has asked. The callback is called only when the event is
+  // recorded, here or later on another thread.
   virtual void sendEventLazy(std::string_view name, PayloadCallback payload) = 0;
 };
 

@@ -26,18 +26,18 @@ void Recorder::start() {
 }
 
 void Recorder::waitUntilOpened() {
-  Lock lock(mutex_);
-  done_.wait(lock, [this] { return opened_; });
+  const platform::MutexLock lock(mutex_);
+  done_.wait(mutex_, [this]() TARN_REQUIRES(mutex_) { return opened_; });
 }
 
 void Recorder::shutdown() {
   if (!thread_.joinable()) return;
   {
-    const Lock lock(mutex_);
+    const platform::MutexLock lock(mutex_);
     stopping_ = true;
     refusing_ = true;  // from here on events are refused, or a hail of them would put the end off for ever
   }
-  work_.notify_one();
+  work_.notifyOne();
   thread_.join();
 }
 
@@ -47,7 +47,7 @@ void Recorder::record(std::string_view backend, std::string_view name, plist::Di
   bool wake = false;
   bool refused = false;
   {
-    const Lock lock(mutex_);
+    const platform::MutexLock lock(mutex_);
     ++handedOver_;
     if (refusing_) [[unlikely]] {
       ++failed_;
@@ -64,22 +64,23 @@ void Recorder::record(std::string_view backend, std::string_view name, plist::Di
       }
     }
   }
-  if (wake) work_.notify_one();
+  if (wake) work_.notifyOne();
   if (refused) log_.error("recorder is not running; the events handed over now are lost");
 }
 
 RecorderCounters Recorder::counters() const {
-  const Lock lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   return {handedOver_, committed_, handedOver_ - committed_ - failed_, expired_, failed_};
 }
 
 bool Recorder::flush(std::chrono::milliseconds timeout) {
-  Lock lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   const std::uint64_t target = handedOver_;
   ++flushers_;
-  work_.notify_one();
+  work_.notifyOne();
   // Events are committed in their order, so the count alone tells.
-  const bool done = done_.wait_for(lock, timeout, [&] { return committed_ + failed_ >= target; });
+  const bool done =
+      done_.waitFor(mutex_, timeout, [&]() TARN_REQUIRES(mutex_) { return committed_ + failed_ >= target; });
   --flushers_;
   return done && failed_ == 0;
 }
@@ -87,64 +88,65 @@ bool Recorder::flush(std::chrono::milliseconds timeout) {
 void Recorder::run() {
   bool healthy = writer_.open() && writer_.settle();
   int triesLeft = options_.shutdownTries;
-  Lock lock(mutex_);
-  opened_ = true;
-  done_.notify_all();
-  for (;;) {
-    healthy ? waitForWork(lock) : waitForRetry(lock);
-    if (stopping_ && (!hasWaiting() || triesLeft == 0)) break;
-    if (position_ == current_.size() && !incoming_.empty()) {
-      current_.swap(incoming_);
-      position_ = 0;
+  {
+    const platform::MutexLock lock(mutex_);
+    opened_ = true;
+    done_.notifyAll();
+    for (;;) {
+      healthy ? waitForWork() : waitForRetry();
+      if (stopping_ && (!hasWaiting() || triesLeft == 0)) break;
+      if (position_ == current_.size() && !incoming_.empty()) {
+        current_.swap(incoming_);
+        position_ = 0;
+      }
+      healthy = position_ < current_.size() ? writeCurrent() : maintain();
+      if (stopping_ && !healthy) --triesLeft;
     }
-    healthy = position_ < current_.size() ? writeCurrent(lock) : maintain(lock);
-    if (stopping_ && !healthy) --triesLeft;
+    giveUp();
   }
-  giveUp(lock);
-  lock.unlock();
   writer_.close();
 }
 
-void Recorder::waitForWork(Lock& lock) {
+void Recorder::waitForWork() {
   retry_ = options_.firstRetry;
   if (position_ < current_.size()) return;
   while (incoming_.empty() && !stopping_) {
     asleep_ = true;
-    const bool due = work_.wait_until(lock, nextMaintenance_) == std::cv_status::timeout;
+    const bool due = !work_.waitUntil(mutex_, nextMaintenance_);
     asleep_ = false;
     if (due && incoming_.empty()) return;
   }
-  gather(lock);
+  gather();
 }
 
 // Company for a commit comes cheap, as long as it doesn't keep the first event waiting.
-void Recorder::gather(Lock& lock) {
+void Recorder::gather() {
   const TimePoint latest = incomingSince_ + options_.groupTime;
   while (!stopping_ && flushers_ == 0 && incoming_.size() < options_.groupEvents &&
          incoming_.bytes() < options_.groupBytes) {
     const TimePoint now = SteadyClock::now();
     if (now >= latest) return;
     const std::uint64_t seen = handedOver_;
-    work_.wait_until(lock, std::min(now + options_.quietTime, latest));
+    work_.waitUntil(mutex_, std::min(now + options_.quietTime, latest));
     if (handedOver_ == seen) return;
   }
 }
 
-void Recorder::waitForRetry(Lock& lock) {
+void Recorder::waitForRetry() {
   const auto pause = std::exchange(retry_, std::min(retry_ * 2, options_.lastRetry));
   // Being called to stop ends a long pause; the last tries then come at their own pace.
   const bool stoppedBefore = stopping_;
   if (stoppedBefore) {
     const TimePoint until = SteadyClock::now() + options_.shutdownRetry;
-    while (work_.wait_until(lock, until) != std::cv_status::timeout) {
+    while (work_.waitUntil(mutex_, until)) {
     }
   } else {
-    work_.wait_for(lock, pause, [this] { return stopping_; });
+    work_.waitFor(mutex_, pause, [this]() TARN_REQUIRES(mutex_) { return stopping_; });
   }
 }
 
-bool Recorder::writeCurrent(Lock& lock) {
-  lock.unlock();
+bool Recorder::writeCurrent() {
+  mutex_.unlock();
   const std::size_t events = writer_.write(current_, position_);
   std::size_t bytes = 0;
   for (std::size_t i = 0; i < events; ++i) {
@@ -152,60 +154,60 @@ bool Recorder::writeCurrent(Lock& lock) {
   }
   position_ += events;
   const bool finished = position_ == current_.size();
-  lock.lock();
-  account(lock, events, bytes);
-  lock.unlock();
+  mutex_.lock();
+  account(events, bytes);
+  mutex_.unlock();
   if (finished) {
     current_.clear();
     position_ = 0;
   }
   const bool healthy = events > 0 && writer_.settle();
-  lock.lock();
+  mutex_.lock();
   return healthy;
 }
 
-bool Recorder::maintain(Lock& lock) {
-  lock.unlock();
+bool Recorder::maintain() {
+  mutex_.unlock();
   const bool healthy = writer_.maintain() && writer_.settle();
   const auto pause = writer_.hasMoreToExpire() ? std::chrono::milliseconds(0) : options_.maintenanceInterval;
   nextMaintenance_ = SteadyClock::now() + pause;
-  lock.lock();
+  mutex_.lock();
   expired_ = writer_.expired();
   return healthy;
 }
 
 // Called locked, and returns so; the room handler runs without the lock.
-void Recorder::account(Lock& lock, std::size_t events, std::size_t bytes) {
+void Recorder::account(std::size_t events, std::size_t bytes) {
   committed_ += events;
   waitingBytes_ -= bytes;
   expired_ = writer_.expired();
-  done_.notify_all();
+  done_.notifyAll();
   const bool hasRoom = full_.load(std::memory_order_relaxed) &&
                        handedOver_ - committed_ - failed_ <= options_.lowWaterEvents &&
                        waitingBytes_ <= options_.lowWaterBytes;
   if (hasRoom) {
     full_.store(false, std::memory_order_relaxed);
     if (roomHandler_) {
-      lock.unlock();
+      mutex_.unlock();
       roomHandler_();
-      lock.lock();
+      mutex_.lock();
     }
   }
 }
 
-void Recorder::giveUp(Lock& lock) {
+void Recorder::giveUp() {
   const std::uint64_t lost = handedOver_ - committed_ - failed_;
   failed_ += lost;
   waitingBytes_ = 0;
   incoming_.clear();
   opened_ = true;
   full_.store(false, std::memory_order_relaxed);
-  done_.notify_all();
+  done_.notifyAll();
   if (lost > 0) {
-    lock.unlock();
+    mutex_.unlock();
     log_.error("recorder gives up " + std::to_string(lost) + " events that could not be written to " +
                options_.file.string() + ": " + writer_.problem());
-    lock.lock();
+    mutex_.lock();
   }
 }
 

@@ -11,16 +11,15 @@
 
 #include <atomic>
 #include <chrono>
-#include <condition_variable>
 #include <cstddef>
 #include <cstdint>
-#include <mutex>
 #include <string_view>
 #include <thread>
 #include <utility>
 
 #include "platform/Clock.h"
 #include "platform/Log.h"
+#include "platform/ThreadSafety.h"
 #include "platform/UniqueFunction.h"
 #include "plist/Dictionary.h"
 #include "recorder/EventWriter.h"
@@ -71,18 +70,17 @@ class Recorder {
   [[nodiscard]] bool flush(std::chrono::milliseconds timeout);
 
  private:
-  using Lock = std::unique_lock<std::mutex>;
   using TimePoint = std::chrono::steady_clock::time_point;
 
   void run();
-  void waitForWork(Lock& lock);
-  void gather(Lock& lock);
-  void waitForRetry(Lock& lock);
-  bool writeCurrent(Lock& lock);
-  bool maintain(Lock& lock);
-  void account(Lock& lock, std::size_t events, std::size_t bytes);
-  void giveUp(Lock& lock);
-  bool hasWaiting() const noexcept { return committed_ + failed_ != handedOver_; }
+  void waitForWork() TARN_REQUIRES(mutex_);
+  void gather() TARN_REQUIRES(mutex_);
+  void waitForRetry() TARN_REQUIRES(mutex_);
+  bool writeCurrent() TARN_REQUIRES(mutex_);
+  bool maintain() TARN_REQUIRES(mutex_);
+  void account(std::size_t events, std::size_t bytes) TARN_REQUIRES(mutex_);
+  void giveUp() TARN_REQUIRES(mutex_);
+  bool hasWaiting() const noexcept TARN_REQUIRES(mutex_) { return committed_ + failed_ != handedOver_; }
 
   const RecorderOptions options_;
   RecorderLog log_;
@@ -97,23 +95,22 @@ class Recorder {
   TimePoint nextMaintenance_;
 
   std::atomic<bool> full_{false};
-  mutable std::mutex mutex_;
-  std::condition_variable work_;  // for the writer thread
-  std::condition_variable done_;  // for those who wait for it
-  // Guarded by mutex_.
-  EventBatch incoming_;
-  TimePoint incomingSince_;
-  std::size_t waitingBytes_ = 0;
-  std::uint64_t handedOver_ = 0;
-  std::uint64_t committed_ = 0;
-  std::uint64_t failed_ = 0;
-  std::uint64_t expired_ = 0;
-  int flushers_ = 0;
-  bool asleep_ = false;  // the writer waits for the first event of a group
-  bool opened_ = false;
-  bool stopping_ = false;
-  bool refusing_ = false;
-  bool refusalLogged_ = false;
+  mutable platform::Mutex mutex_;
+  platform::ConditionVariable work_;  // for the writer thread
+  platform::ConditionVariable done_;  // for those who wait for it
+  EventBatch incoming_ TARN_GUARDED_BY(mutex_);
+  TimePoint incomingSince_ TARN_GUARDED_BY(mutex_);
+  std::size_t waitingBytes_ TARN_GUARDED_BY(mutex_) = 0;
+  std::uint64_t handedOver_ TARN_GUARDED_BY(mutex_) = 0;
+  std::uint64_t committed_ TARN_GUARDED_BY(mutex_) = 0;
+  std::uint64_t failed_ TARN_GUARDED_BY(mutex_) = 0;
+  std::uint64_t expired_ TARN_GUARDED_BY(mutex_) = 0;
+  int flushers_ TARN_GUARDED_BY(mutex_) = 0;
+  bool asleep_ TARN_GUARDED_BY(mutex_) = false;  // the writer waits for the first event of a group
+  bool opened_ TARN_GUARDED_BY(mutex_) = false;
+  bool stopping_ TARN_GUARDED_BY(mutex_) = false;
+  bool refusing_ TARN_GUARDED_BY(mutex_) = false;
+  bool refusalLogged_ TARN_GUARDED_BY(mutex_) = false;
 };
 
 }  // namespace tarn::recorder

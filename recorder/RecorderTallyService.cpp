@@ -29,7 +29,6 @@ bool RecorderTallyService::eventIsInUse(std::string_view name) {
 }
 
 void RecorderTallyService::sendEventLazy(std::string_view name, PayloadCallback payload) {
-  if (!eventIsInUse(name)) return;
   recorder_.record("tally", name, payload(), plist::Dictionary(), clock_.epochSeconds());
 }
 

@@ -1,5 +1,5 @@
-// RecorderTallyService: the analytics-event service as the recorder stands in for it. Events of the names that the
-// configuration wants are recorded under back-end "tally"; of others not even the payload is asked for.
+// RecorderTallyService: the analytics-event service as the recorder stands in for it. The configuration says which
+// names are in use; what is handed over is recorded under back-end "tally".
 //
 // Owner: the entry point. Threads: the server queue.
 #pragma once

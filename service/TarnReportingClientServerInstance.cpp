@@ -9,6 +9,7 @@
 #include "service/TarnReportingServiceDelegateProtocol.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
+#include "service/vocabulary/TarnReportingServerQueue.h"
 #include "service/vocabulary/TarnReportingSignpost.h"
 #include "service/vocabulary/TarnReportingUtility.h"
 #include "session/TarnReportingSession.h"
@@ -18,6 +19,7 @@ namespace tarn {
 namespace {
 
 constexpr std::string_view kModule = "TarnReportingClientServerInstance";
+constexpr TarnReportingLogger kLog{TarnReportingClientCategory, kModule};
 constexpr std::string_view kErrorDomain = "sys.oxbow.audio.reporting";
 constexpr std::int64_t kReportingDisabled = 1;
 constexpr int kKilledExitStatus = 2;
@@ -26,11 +28,6 @@ constexpr std::uint32_t kTraceCreate = 0x21044814;
 constexpr std::uint32_t kTraceStart = 0x21044818;
 constexpr std::uint32_t kTraceStop = 0x2104481C;
 constexpr std::uint32_t kTraceSend = 0x21044824;
-
-template <class... Arguments>
-void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
-  TarnReportingLog(TarnReportingClientCategory(), level, kModule, text, arguments...);
-}
 
 void trace(std::uint32_t code, std::int64_t reporterID) {
   TarnReportingFacilities().tracePoints.emit(code, reporterID);
@@ -76,11 +73,11 @@ std::shared_ptr<TarnReportingClientServerInstance> TarnReportingClientServerInst
 TarnReportingClientServerInstance::TarnReportingClientServerInstance(
     std::int32_t processIdentifier, std::weak_ptr<TarnReportingServiceDelegateProtocol> delegate)
     : processIdentifier_(processIdentifier), delegate_(std::move(delegate)) {
-  log(LogLevel::Debug, "new client with pid %lu", processIdentifier_);
+  kLog(LogLevel::Debug, "new client with pid %lu", processIdentifier_);
 }
 
 TarnReportingClientServerInstance::~TarnReportingClientServerInstance() {
-  log(LogLevel::Default, "dealloc %i from the server client list", processIdentifier_);
+  kLog(LogLevel::Default, "dealloc %i from the server client list", processIdentifier_);
 }
 
 void TarnReportingClientServerInstance::createReportingSession(std::int64_t reporterID, platform::Acknowledge reply) {
@@ -104,7 +101,7 @@ void TarnReportingClientServerInstance::getServiceNameForReporterID(std::int64_t
                                                                     platform::Reply<std::uint16_t> reply) {
   onServerQueue([self = shared_from_this(), reporterID, reply = std::move(reply)]() mutable {
     const auto signpost = operation("getServiceNameForReporterID", {"reporterID", reporterID});
-    log(LogLevel::Default, "fetching seviceType");
+    kLog(LogLevel::Default, "fetching seviceType");
     const auto session = reporterID == 0 ? nullptr : self->findReportingSessionForID(reporterID, true);
     reply(std::nullopt, static_cast<std::uint16_t>(session ? session->serviceType() : AudioServiceType::Unknown));
   });
@@ -115,7 +112,7 @@ void TarnReportingClientServerInstance::setConfiguration(plist::Dictionary confi
   onServerQueue([self = shared_from_this(), configuration = std::move(configuration), reporterID,
                  reply = std::move(reply)]() mutable {
     const auto signpost = operation("setConfiguration", {"reporterID", reporterID});
-    log(LogLevel::Default, "setting configuration");
+    kLog(LogLevel::Default, "setting configuration");
     if (const auto session = self->findReportingSessionForID(reporterID, false)) {
       session->updateConfigurationWithContentsOfConfiguration(&configuration);
     }
@@ -167,7 +164,7 @@ void TarnReportingClientServerInstance::destroyReportingSession(std::int64_t rep
 void TarnReportingClientServerInstance::reporterID(std::int64_t reporterID, platform::Reply<plist::Dictionary> reply) {
   onServerQueue([self = shared_from_this(), reporterID, reply = std::move(reply)]() mutable {
     const auto signpost = operation("reporterID", {"reporterID", reporterID});
-    log(LogLevel::Default, "validating reporter %lli", reporterID);
+    kLog(LogLevel::Default, "validating reporter %lli", reporterID);
     plist::Dictionary answer{{"reporterID", 0}, {"serviceType", static_cast<int>(AudioServiceType::Unknown)}};
     if (const auto session = self->findReportingSessionForID(reporterID, true)) {
       answer.set("reporterID", reporterID);
@@ -195,7 +192,7 @@ void TarnReportingClientServerInstance::getAllReporters(platform::Reply<std::vec
 void TarnReportingClientServerInstance::killService() {
   onServerQueue([] {
     const auto signpost = operation("killService");
-    log(LogLevel::Default, "DESTROYING SERVICE");
+    kLog(LogLevel::Default, "DESTROYING SERVICE");
     TarnReportingFacilities().processControl.exitProcess(kKilledExitStatus);
   });
 }
@@ -209,6 +206,7 @@ void TarnReportingClientServerInstance::handleConnectionError() {
 
 std::shared_ptr<TarnReportingSession> TarnReportingClientServerInstance::findReportingSessionForID(
     std::int64_t reporterID, bool acrossAllClients) {
+  TarnReportingRequireServerQueue();
   auto session = sessions_.find(reporterID);
   if (!session && acrossAllClients) {
     if (const auto service = delegate_.lock()) {
@@ -231,14 +229,14 @@ void TarnReportingClientServerInstance::logReportingSessions() {
 }
 
 void TarnReportingClientServerInstance::create(std::int64_t reporterID) {
-  log(LogLevel::Default, "creating session for reporter %lli", reporterID);
+  kLog(LogLevel::Default, "creating session for reporter %lli", reporterID);
   trace(kTraceCreate, reporterID);
   sessions_.store(reporterID, makeSession(reporterID));
-  log(LogLevel::Default, "session created for reporter %lli", reporterID);
+  kLog(LogLevel::Default, "session created for reporter %lli", reporterID);
 }
 
 void TarnReportingClientServerInstance::retype(std::uint16_t serviceType, std::int64_t reporterID) {
-  log(LogLevel::Default, "setting service type %i for reporter %lli", serviceType, reporterID);
+  kLog(LogLevel::Default, "setting service type %i for reporter %lli", serviceType, reporterID);
   const auto type = static_cast<AudioServiceType>(serviceType);
   const auto session = reporterID == 0 ? nullptr : findReportingSessionForID(reporterID, false);
   if (session && session->serviceType() == type) {
@@ -251,11 +249,11 @@ void TarnReportingClientServerInstance::retype(std::uint16_t serviceType, std::i
     replacement->setServiceType(type);
     sessions_.store(reporterID, replacement);
   }
-  log(LogLevel::Default, "service type %i set for reporter  %lli", serviceType, reporterID);
+  kLog(LogLevel::Default, "service type %i set for reporter  %lli", serviceType, reporterID);
 }
 
 void TarnReportingClientServerInstance::start(std::int64_t reporterID, platform::Acknowledge reply) {
-  log(LogLevel::Default, "starting session for reporter %lli", reporterID);
+  kLog(LogLevel::Default, "starting session for reporter %lli", reporterID);
   trace(kTraceStart, reporterID);
   const auto session = reporterID == 0 ? nullptr : findReportingSessionForID(reporterID, false);
   if (!session) {
@@ -275,7 +273,7 @@ void TarnReportingClientServerInstance::start(std::int64_t reporterID, platform:
 }
 
 void TarnReportingClientServerInstance::stop(std::int64_t reporterID) {
-  log(LogLevel::Default, "stopping session for reporter %lli", reporterID);
+  kLog(LogLevel::Default, "stopping session for reporter %lli", reporterID);
   trace(kTraceStop, reporterID);
   if (reporterID == 0) {
     return;
@@ -286,29 +284,29 @@ void TarnReportingClientServerInstance::stop(std::int64_t reporterID) {
     sendHeldReply(*session);
     logReportingSessions();
   } else {
-    log(
+    kLog(
         LogLevel::Error,
         "Stop called, but session==nil or session.started==false. reporterID=%lli session=%@ session.started=%i",
         reporterID, [&] { return session ? session->description() : std::string("(null)"); },
         session && session->started());
   }
-  log(LogLevel::Default, "stopping %lli", reporterID);
+  kLog(LogLevel::Default, "stopping %lli", reporterID);
 }
 
 void TarnReportingClientServerInstance::destroy(std::int64_t reporterID) {
-  log(LogLevel::Default, "destroying session for reporter %lli", reporterID);
+  kLog(LogLevel::Default, "destroying session for reporter %lli", reporterID);
   if (const auto session = sessions_.find(reporterID); session && session->started()) {
     session->stop();
   }
   sessions_.remove(reporterID);
-  log(LogLevel::Default, "destroying %lli", reporterID);
+  kLog(LogLevel::Default, "destroying %lli", reporterID);
   logReportingSessions();
 }
 
 void TarnReportingClientServerInstance::send(plist::Dictionary message, std::uint32_t category, std::uint16_t type,
                                              const platform::ReporterIDs& reporterIDs, platform::Reply<>& reply) {
   plist::Array storage;
-  log(LogLevel::Debug, "sending message for reporter %@", [&] { return textOf(reporterIDs, storage); });
+  kLog(LogLevel::Debug, "sending message for reporter %@", [&] { return textOf(reporterIDs, storage); });
   trace(kTraceSend, processIdentifier_);
   const auto service = delegate_.lock();
   if (!service || !service->isReportingEnabled()) {
@@ -331,6 +329,7 @@ void TarnReportingClientServerInstance::send(plist::Dictionary message, std::uin
 }
 
 void TarnReportingClientServerInstance::endClient() {
+  TarnReportingRequireServerQueue();
   const auto service = delegate_.lock();
   if (!service) {
     return;
@@ -348,7 +347,7 @@ void TarnReportingClientServerInstance::endClient() {
   });
   sessions_.clear();
   service->removeClient(*this);
-  log(LogLevel::Default, "removing %i from the server client list", processIdentifier_);
+  kLog(LogLevel::Default, "removing %i from the server client list", processIdentifier_);
 }
 
 }  // namespace tarn

@@ -12,6 +12,7 @@
 #include "service/TarnReportingClientServerInstance.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
+#include "service/vocabulary/TarnReportingServerQueue.h"
 #include "service/vocabulary/TarnReportingUtility.h"
 #include "session/TarnReportingSession.h"
 
@@ -19,14 +20,10 @@ namespace tarn {
 
 namespace {
 
-constexpr std::string_view kModule = "TarnReportingService";
+constexpr TarnReportingLogger kLog{TarnReportingServiceDelegateCategory, "TarnReportingService"};
+constexpr std::string_view kUptimeEvent = "sys.oxbow.tarnkit.tarnreportingclientuptime";
 constexpr std::int64_t kSingleMessageReporterID = 1;
 constexpr std::chrono::duration<double> kTimeout(TarnReportingService::kSingleMessageSessionTimeoutSeconds);
-
-template <class... Arguments>
-void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
-  TarnReportingLog(TarnReportingServiceDelegateCategory(), level, kModule, text, arguments...);
-}
 
 // Every start, stop and message without IDs logs these lists. So that a client with thousands of running sessions can't
 // slow down the others or fill the disk with them, a long one ends in the count of those that it leaves out.
@@ -52,14 +49,14 @@ plist::ValueView nameOf(const TarnReportingClientServerInstance& client) {
 std::int64_t uptimeOf(const TarnReportingClientServerInstance& client) {
   const std::optional<double> start = client.clientStartDate();
   if (!start) {
-    log(LogLevel::Default, "clientStartDate is nil. clientpid=%d clientprocessname=%@", client.processIdentifier(),
-        nameOf(client));
+    kLog(LogLevel::Default, "clientStartDate is nil. clientpid=%d clientprocessname=%@", client.processIdentifier(),
+         nameOf(client));
     return -1;
   }
   const double interval = TarnReportingFacilities().clock.epochSeconds() - *start;
   if (interval < 0) {
-    log(LogLevel::Default, "clientStartDate is in the past. clientpid=%d clientprocessname=%@",
-        client.processIdentifier(), nameOf(client));
+    kLog(LogLevel::Default, "clientStartDate is in the past. clientpid=%d clientprocessname=%@",
+         client.processIdentifier(), nameOf(client));
   }
   return plist::ValueView(std::abs(interval)).asInt64();
 }
@@ -76,12 +73,12 @@ std::shared_ptr<TarnReportingService> TarnReportingService::create() {
 TarnReportingService::TarnReportingService() = default;
 
 TarnReportingService::~TarnReportingService() {
-  log(LogLevel::Default, "destroying service");
+  kLog(LogLevel::Default, "destroying service");
 }
 
 bool TarnReportingService::listenerShouldAcceptNewConnection(const std::shared_ptr<platform::Connection>& connection) {
   const std::int32_t processIdentifier = connection->processIdentifier();
-  log(LogLevel::Default, "newConnection: %@", [&] { return connection->description(); });
+  kLog(LogLevel::Default, "newConnection: %@", [&] { return connection->description(); });
   std::shared_ptr<TarnReportingClientServerInstance> client;
   {
     const std::lock_guard lock(mutex_);
@@ -96,7 +93,7 @@ bool TarnReportingService::listenerShouldAcceptNewConnection(const std::shared_p
   });
   const std::weak_ptr<TarnReportingClientServerInstance> weakClient = client;
   connection->setInterruptionHandler([weakClient] {
-    log(LogLevel::Default, "interruptionHandler: connection exited");
+    kLog(LogLevel::Default, "interruptionHandler: connection exited");
     if (const auto interrupted = weakClient.lock()) {
       interrupted->handleConnectionError();
     }
@@ -118,17 +115,20 @@ void TarnReportingService::handleInvalidation(const std::weak_ptr<TarnReportingC
   client->handleConnectionError();
   const std::int64_t uptime = uptimeOf(*client);
   const std::string& name = client->clientProcessName();
-  log(LogLevel::Default, "invalidationHandler: connection exited process=%@ uptime_sec=%d", nameOf(*client), uptime);
+  kLog(LogLevel::Default, "invalidationHandler: connection exited process=%@ uptime_sec=%d", nameOf(*client), uptime);
   if (name.empty()) {
-    log(LogLevel::Default, "clientProcessName is nil. clientpid=%d", client->processIdentifier());
+    kLog(LogLevel::Default, "clientProcessName is nil. clientpid=%d", client->processIdentifier());
     return;
   }
-  TarnReportingFacilities().tally.sendEventLazy("sys.oxbow.tarnkit.tarnreportingclientuptime", [name, uptime] {
-    return plist::Dictionary{{"processName", name}, {"seconds", uptime}};
-  });
+  if (platform::TallyService& tally = TarnReportingFacilities().tally; tally.eventIsInUse(kUptimeEvent)) {
+    tally.sendEventLazy(kUptimeEvent, [name, uptime] {
+      return plist::Dictionary{{"processName", name}, {"seconds", uptime}};
+    });
+  }
 }
 
 TarnReportingService::Sessions TarnReportingService::getAllActiveReportingSessions() {
+  TarnReportingRequireServerQueue();
   Sessions active;
   for (const auto& client : clients_) {
     Sessions ofClient;
@@ -138,8 +138,8 @@ TarnReportingService::Sessions TarnReportingService::getAllActiveReportingSessio
             ofClient.push_back(session);
           }
         });
-    log(LogLevel::Default, "sessions for client %i : %@", client->processIdentifier(),
-        [&] { return descriptions(ofClient); });
+    kLog(LogLevel::Default, "sessions for client %i : %@", client->processIdentifier(),
+         [&] { return descriptions(ofClient); });
     active.insert(active.end(), ofClient.begin(), ofClient.end());
   }
   return active;
@@ -152,11 +152,11 @@ std::shared_ptr<TarnReportingSession> TarnReportingService::findReportingSession
   }
   for (const auto& client : clients_) {
     if (auto session = client->clientReportingSessionMap().find(reporterID)) {
-      log(LogLevel::Info, "found reporting session %lli for client %i", reporterID, client->processIdentifier());
+      kLog(LogLevel::Info, "found reporting session %lli for client %i", reporterID, client->processIdentifier());
       return session;
     }
   }
-  log(LogLevel::Error, "failed to find reporting session %lli", reporterID);
+  kLog(LogLevel::Error, "failed to find reporting session %lli", reporterID);
   return nullptr;
 }
 
@@ -190,7 +190,7 @@ void TarnReportingService::removeClient(const TarnReportingClientServerInstance&
 
 void TarnReportingService::logReportingSessions() {
   const Sessions active = getAllActiveReportingSessions();
-  log(LogLevel::Default, "%ld active reporting session(s) %@", active.size(), [&] { return descriptions(active); });
+  kLog(LogLevel::Default, "%ld active reporting session(s) %@", active.size(), [&] { return descriptions(active); });
 }
 
 std::size_t TarnReportingService::sessionCount() const {
@@ -203,9 +203,10 @@ std::size_t TarnReportingService::sessionCount() const {
 }
 
 std::shared_ptr<TarnReportingSession> TarnReportingService::retrieveSingleMessageSession() {
+  TarnReportingRequireServerQueue();
   singleMessageSessionLastRetrieved_ = TarnReportingFacilities().clock.monotonic();
   if (!singleMessageSession_) {
-    log(LogLevel::Default, "Creating singleMessageSession");
+    kLog(LogLevel::Default, "Creating singleMessageSession");
     singleMessageSession_ = TarnReportingSession::initWithID(
         kSingleMessageReporterID, {TarnReportingFacilities().processFacts.ownProcessIdentifier()},
         TarnReportingSession::Mode::SingleMessage);
@@ -229,16 +230,17 @@ void TarnReportingService::queueStopSingleSession(std::chrono::nanoseconds delay
 }
 
 void TarnReportingService::checkSingleSession() {
+  TarnReportingRequireServerQueue();
   const std::chrono::duration<double> idle =
       TarnReportingFacilities().clock.monotonic() - singleMessageSessionLastRetrieved_;
   if (idle > kTimeout) {
-    log(LogLevel::Default, "Stopping singleMessageSession timeout=%f", kTimeout.count());
+    kLog(LogLevel::Default, "Stopping singleMessageSession timeout=%f", kTimeout.count());
     singleMessageSession_->stop();
     singleMessageSession_.reset();
     return;
   }
-  log(LogLevel::Debug, "Not stopping singleMessageSession timeSinceLastUsed=%f timeout=%f", idle.count(),
-      kTimeout.count());
+  kLog(LogLevel::Debug, "Not stopping singleMessageSession timeSinceLastUsed=%f timeout=%f", idle.count(),
+       kTimeout.count());
   queueStopSingleSession(std::chrono::duration_cast<std::chrono::nanoseconds>(kTimeout));
 }
 

@@ -7,6 +7,7 @@
 #include "service/vocabulary/ProcessState.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
+#include "service/vocabulary/TarnReportingServerQueue.h"
 #include "service/vocabulary/TarnReportingUtility.h"
 #include "session/TarnReportingSessionKeys.h"
 
@@ -14,7 +15,7 @@ namespace tarn {
 
 namespace {
 
-constexpr std::string_view kModule = "TarnReportingSession";
+constexpr TarnReportingLogger kLog{TarnReportingSessionCategory, "TarnReportingSession"};
 
 constexpr std::uint32_t kTraceCreated = 0x21044828;
 constexpr std::uint32_t kTraceStarted = 0x2104482C;
@@ -29,11 +30,6 @@ struct ClassLists {
 
 void trace(std::uint32_t code, std::int64_t reporterID) {
   TarnReportingFacilities().tracePoints.emit(code, reporterID);
-}
-
-template <class... Arguments>
-void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
-  TarnReportingLog(TarnReportingSessionCategory(), level, kModule, text, arguments...);
 }
 
 }  // namespace
@@ -57,6 +53,7 @@ const TarnReportingSessionWorkerClasses& TarnReportingSession::workerClasses() {
 std::shared_ptr<TarnReportingSession> TarnReportingSession::initWithID(std::int64_t reporterID,
                                                                        std::vector<std::int32_t> processIdentifiers,
                                                                        Mode mode) {
+  TarnReportingRequireServerQueue();
   struct Constructible : TarnReportingSession {
     Constructible(std::int64_t theID, std::vector<std::int32_t> identifiers, Mode theMode)
         : TarnReportingSession(theID, std::move(identifiers), theMode) {}
@@ -64,7 +61,7 @@ std::shared_ptr<TarnReportingSession> TarnReportingSession::initWithID(std::int6
   std::shared_ptr<TarnReportingSession> session =
       std::make_shared<Constructible>(reporterID, std::move(processIdentifiers), mode);
   session->workers_.startWorkersFromClasses(workerClasses().startOnInitWorkerClasses, session);
-  log(LogLevel::Info, "created reporting session for ID: %lli", reporterID);
+  kLog(LogLevel::Info, "created reporting session for ID: %lli", reporterID);
   trace(kTraceCreated, reporterID);
   return session;
 }
@@ -77,17 +74,19 @@ TarnReportingSession::TarnReportingSession(std::int64_t reporterID, std::vector<
       serviceName_(TarnReportingUtilityGenerateServiceNameFromServiceType(serviceType_)) {}
 
 TarnReportingSession::~TarnReportingSession() {
-  log(LogLevel::Info, "deallocing this session %lli", reporterID_);
+  kLog(LogLevel::Info, "deallocing this session %lli", reporterID_);
   trace(kTraceDestroyed, reporterID_);
 }
 
 void TarnReportingSession::setServiceType(AudioServiceType serviceType) {
+  TarnReportingRequireServerQueue();
   serviceType_ = serviceType;
   serviceName_ = TarnReportingUtilityGenerateServiceNameFromServiceType(serviceType);
-  log(LogLevel::Info, "setting service type %@", serviceName_);
+  kLog(LogLevel::Info, "setting service type %@", serviceName_);
 }
 
 void TarnReportingSession::updateConfigurationWithContentsOfConfiguration(const plist::Dictionary* configuration) {
+  TarnReportingRequireServerQueue();
   static const plist::Key kMirrored("KvHostApplicationDisplayID");
   if (configuration == nullptr) {
     return;
@@ -97,25 +96,27 @@ void TarnReportingSession::updateConfigurationWithContentsOfConfiguration(const 
 }
 
 void TarnReportingSession::start() {
+  TarnReportingRequireServerQueue();
   appendMarker(AudioEventType::Start, "start");
-  log(LogLevel::Info, "start called. reporterID=%lli", reporterID_);
+  kLog(LogLevel::Info, "start called. reporterID=%lli", reporterID_);
   if (started_) {
-    log(LogLevel::Info, "%lli is already started", reporterID_);
+    kLog(LogLevel::Info, "%lli is already started", reporterID_);
     return;
   }
-  log(LogLevel::Debug, "self.started==false. starting. reporterID=%lli", reporterID_);
+  kLog(LogLevel::Debug, "self.started==false. starting. reporterID=%lli", reporterID_);
   started_ = true;
   trace(kTraceStarted, reporterID_);
   workers_.startWorkersFromClasses(workerClasses().initializableWorkerClasses, shared_from_this());
 }
 
 void TarnReportingSession::stop() {
+  TarnReportingRequireServerQueue();
   appendMarker(AudioEventType::Stop, "stop");
-  log(LogLevel::Debug, "stop called. reporterID=%lli", reporterID_);
+  kLog(LogLevel::Debug, "stop called. reporterID=%lli", reporterID_);
   if (!started_) {
     return;
   }
-  log(LogLevel::Debug, "ending session. reporterID=%lli", reporterID_);
+  kLog(LogLevel::Debug, "ending session. reporterID=%lli", reporterID_);
   trace(kTraceStopped, reporterID_);
   log_.sort();
   workers_.stopWorkers(reporterID_);

@@ -9,6 +9,7 @@
 #include "plist/Value.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
+#include "service/vocabulary/TarnReportingServerQueue.h"
 #include "service/vocabulary/TarnReportingSignpost.h"
 #include "service/vocabulary/TarnReportingUtility.h"
 #include "session/TarnReportingSession.h"
@@ -19,6 +20,7 @@ namespace tarn {
 namespace {
 
 constexpr std::string_view kModule = "TarnReportingSession";
+constexpr TarnReportingLogger kLog{TarnReportingSessionCategory, kModule};
 constexpr std::uint32_t kTraceMessage = 0x21044838;
 constexpr double kOldestStampSeconds = 31536000;  // 365 days
 
@@ -35,6 +37,7 @@ std::string withoutBlanks(std::string_view key) {
 }  // namespace
 
 void TarnReportingSession::sendMessage(const MessagePointer& message, platform::Reply<> reply) {
+  TarnReportingRequireServerQueue();
   const TarnReportingSignpost signpost(SignpostCategory::Message, kModule, "sendMessage", {"reporterID", reporterID_});
   ++totalMessageCount_;
   addMissingDates(*message);
@@ -44,11 +47,10 @@ void TarnReportingSession::sendMessage(const MessagePointer& message, platform::
   TarnReportingFacilities().tracePoints.emit(kTraceMessage, reporterID_);
   message->setIsSessionStarted(started_);
   message->setIsRedundant(messageIsRedundant(*message));
-  TarnReportingLog(
-      TarnReportingSessionCategory(), LogLevel::Debug, kModule,
-      "TarnReportingSessionWorker action=sendMessage reporterID=%lli app=%@ redundant=%@ message=%@", reporterID_,
-      [&] { return TarnReportingUtilityRetrieveAppName(configuration_); }, message->isRedundant() ? "YES" : "NO",
-      message->message());
+  kLog(
+      LogLevel::Debug, "TarnReportingSessionWorker action=sendMessage reporterID=%lli app=%@ redundant=%@ message=%@",
+      reporterID_, [&] { return TarnReportingUtilityRetrieveAppName(configuration_); },
+      message->isRedundant() ? "YES" : "NO", message->message());
   previousValues_.merge(message->message());
   if (!message->isRedundant()) {
     log_.append(message);
@@ -128,7 +130,7 @@ bool TarnReportingSession::messageIsRedundant(const TarnReportingSessionMessage&
   if (earlier == nullptr || !message.message().equalsIgnoring(earlier->message(), kIgnored)) {
     return false;
   }
-  TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, kModule, "marking event redundant");
+  kLog(LogLevel::Debug, "marking event redundant");
   return true;
 }
 

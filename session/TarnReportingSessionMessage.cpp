@@ -11,7 +11,7 @@ namespace tarn {
 
 namespace {
 
-constexpr std::string_view kModule = "TarnReportingSessionMessage";
+constexpr TarnReportingLogger kLog{TarnReportingSessionCategory, "TarnReportingSessionMessage"};
 
 double sortingTime(const TarnReportingSessionMessage& message) {
   const double time = message.message().get(keys::kTimestamp).asDouble();
@@ -39,7 +39,7 @@ std::string TarnReportingSessionMessage::description() const {
 }
 
 std::shared_ptr<TarnReportingSessionMessage> TarnReportingSessionMessage::copyWithZone() const {
-  TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, kModule, "copyWithZone");
+  kLog(LogLevel::Debug, "copyWithZone");
   auto copy = std::make_shared<TarnReportingSessionMessage>(message_, category_, type_);
   copy->isRedundant_ = isRedundant_;
   copy->isSessionStarted_ = isSessionStarted_;

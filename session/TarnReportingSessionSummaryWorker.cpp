@@ -12,6 +12,8 @@ namespace tarn {
 
 namespace {
 
+constexpr TarnReportingLogger kLog{TarnReportingSummaryLogCategory, "TarnReportingSessionSummaryWorker"};
+
 const plist::Key kSessionDuration("session_duration");
 const plist::Key kIssueType("issue_type");
 
@@ -37,8 +39,7 @@ void addMachineFacts(plist::Dictionary& summary) {
   if (footprint.bytes) {
     summary.set("vmInfo_phys_footprint_MiB", *footprint.bytes >> 20U);
   } else {
-    TarnReportingLog(TarnReportingSummaryLogCategory(), LogLevel::Error, "TarnReportingSessionSummaryWorker",
-                     "Error with task_info(): %s", footprint.error);
+    kLog(LogLevel::Error, "Error with task_info(): %s", footprint.error);
   }
   const platform::LoadAverages load = facts.loadAverages();
   summary.set("load_avg_1_min", load.oneMinute);

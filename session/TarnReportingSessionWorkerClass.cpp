@@ -4,12 +4,17 @@
 
 namespace tarn {
 
+namespace {
+
+constexpr TarnReportingLogger kLog{TarnReportingSessionCategory, "TarnReportingSession"};
+
+}  // namespace
+
 TarnReportingSessionWorkerClasses::TarnReportingSessionWorkerClasses(
     std::span<const TarnReportingSessionWorkerClass> table) {
   for (const TarnReportingSessionWorkerClass& row : table) {
     if (row.initWithSession == nullptr) {
-      TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Debug, "TarnReportingSession",
-                       "Worker does not implement initWithSession! %@", row.name);
+      kLog(LogLevel::Debug, "Worker does not implement initWithSession! %@", row.name);
       continue;
     }
     initializableWorkerClasses.push_back(&row);

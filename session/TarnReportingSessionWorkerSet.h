@@ -20,7 +20,7 @@ class TarnReportingSessionWorkerSet {
 
   struct Member {
     const Class* workerClass;
-    Worker* worker;
+    std::unique_ptr<Worker> worker;
     TarnReportingSessionWorkerConsumerProtocol* consumer;  // null: no consumer
   };
 
@@ -39,21 +39,13 @@ class TarnReportingSessionWorkerSet {
 
   // Every worker, in the order of creation.
   const std::vector<Member>& messageWorkers() const noexcept { return messageWorkers_; }
-  const std::vector<Member>& consumingMessageWorkers() const noexcept { return consumingMessageWorkers_; }
-  const std::vector<Member>& producingMessageWorkers() const noexcept { return producingMessageWorkers_; }
-  const TarnReportingSessionWorkerClasses::List& initializedWorkerClasses() const noexcept {
-    return initializedWorkerClasses_;
-  }
 
  private:
   void makeWorker(const Class& workerClass, const std::shared_ptr<TarnReportingSession>& session);
   void startWorkers(std::int64_t reporterID);
+  bool holds(const Class& workerClass) const noexcept;
 
-  std::vector<std::unique_ptr<Worker>> owned_;
   std::vector<Member> messageWorkers_;
-  std::vector<Member> consumingMessageWorkers_;
-  std::vector<Member> producingMessageWorkers_;
-  TarnReportingSessionWorkerClasses::List initializedWorkerClasses_;
 };
 
 }  // namespace tarn

@@ -54,9 +54,12 @@ class ManualSchedule {
       endSuspension(found);
     }
   }
-  bool isCurrent(std::size_t queue) const {
+  bool isCurrent(std::size_t queue, bool isServers) const {
     const std::lock_guard lock(mutex_);
-    return !running_.empty() && running_.back() == queue && runner_ == std::this_thread::get_id();
+    if (running_.empty()) {
+      return isServers && maker_ == std::this_thread::get_id();
+    }
+    return running_.back() == queue && runner_ == std::this_thread::get_id();
   }
   std::size_t waiting(Filter filter) {
     const std::lock_guard lock(mutex_);
@@ -182,6 +185,7 @@ class ManualSchedule {
   Suspensions suspended_;             // by queue
   std::vector<std::size_t> running_;  // the queues whose work runs, the innermost last
   std::thread::id runner_;
+  const std::thread::id maker_ = std::this_thread::get_id();
 };
 
 }  // namespace detail
@@ -199,7 +203,7 @@ void ManualWorkQueue::asyncAfter(std::chrono::nanoseconds delay, platform::Work 
 }
 
 bool ManualWorkQueue::isCurrent() const noexcept {
-  return schedule_->isCurrent(identifier_);
+  return schedule_->isCurrent(identifier_, quality_ == platform::QualityOfService::UserInteractive);
 }
 
 std::size_t ManualWorkQueue::waiting() const noexcept {

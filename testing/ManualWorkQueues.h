@@ -5,6 +5,9 @@
 // up stays where it is, work of the others runs. So a piece of work that waits for a back-end can let the back-end
 // work.
 //
+// The server queue (the user-interactive one) is the test's own: while no work runs, the thread that made the queues
+// counts as running work of it, so a test calls what is bound to that queue directly.
+//
 // Threads: work may be handed over on any thread; the run operations are for one thread at a time.
 #pragma once
 

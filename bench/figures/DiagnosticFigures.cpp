@@ -63,7 +63,7 @@ constexpr std::array kFigures{
 // The Snare worker of the session, null without one.
 const TarnReportingSessionSnareWorker* snareWorkerOf(const TarnReportingSession& session) {
   for (const auto& member : session.workers().messageWorkers()) {
-    if (const auto* snare = dynamic_cast<const TarnReportingSessionSnareWorker*>(member.worker)) {
+    if (const auto* snare = dynamic_cast<const TarnReportingSessionSnareWorker*>(member.worker.get())) {
       return snare;
     }
   }
@@ -96,7 +96,7 @@ void sendWanted(TarnReportingSession& session) {
 class Intake {
  public:
   explicit Intake(Classes workers) : session_(makeWith(workers)), feeder_(*session_, AudioEventType::State) {
-    if (session_->workers().consumingMessageWorkers().size() != workers.size()) {
+    if (session_->workers().messageWorkers().size() != workers.size()) {
       fail("a diagnostic worker declined");
     }
   }

@@ -82,7 +82,9 @@ class Platform {
   testing::FakePlatform fakes_;
   linux_host::LinuxClock clock_;
   ForgetfulService service_;
-  linux_host::LinuxWorkQueues queues_{clock_, nullptr};
+  // The caller's thread stands in for the server queue.
+  linux_host::LinuxWorkQueues queues_{
+      clock_, fakes_.workQueues.makeSerialQueue("server", platform::QualityOfService::UserInteractive)};
   const platform::Facilities facilities_{.clock = clock_,
                                          .workQueues = queues_,
                                          .conditions = fakes_.conditions,

@@ -31,7 +31,7 @@ struct TarnReportingDriverUtility::DriverStats {
 
 namespace {
 
-constexpr std::string_view kModule = "TarnReportingDriverUtility";
+constexpr TarnReportingLogger kLog{TarnReportingDriverUtilityCategory, "TarnReportingDriverUtility"};
 
 struct DriverGroup {
   const char* group;     // null: any
@@ -47,11 +47,6 @@ constexpr std::array<DriverGroup, 9> kDriverGroups{{{"OxbowAE2MCA", nullptr},
                                                     {"Tx", nullptr},
                                                     {nullptr, "Tympan2"},
                                                     {"pdm", nullptr}}};
-
-template <class... Arguments>
-void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
-  TarnReportingLog(TarnReportingDriverUtilityCategory(), level, kModule, text, arguments...);
-}
 
 using Name = std::optional<std::string>;
 
@@ -70,7 +65,7 @@ std::int64_t codeOf(const platform::MaybeError& error) {
 // Of sampling and of taking a difference alike.
 void logSamplingError(const platform::MaybeError& error) {
   if (error) {
-    log(LogLevel::Error, "FlumeCreateSamples error %li", error->code);
+    kLog(LogLevel::Error, "FlumeCreateSamples error %li", error->code);
   }
 }
 
@@ -118,7 +113,7 @@ std::shared_ptr<const TarnReportingDriverUtility> TarnReportingDriverUtility::sh
 }
 
 void TarnReportingDriverUtility::init() {
-  log(LogLevel::Info, "creating flume driver utility");
+  kLog(LogLevel::Info, "creating flume driver utility");
   for (const DriverGroup& each : kDriverGroups) {
     subscribe(TarnReportingDriver::driverWithGroupName(nameOf(each.group), nameOf(each.subGroup)));
   }
@@ -129,29 +124,29 @@ void TarnReportingDriverUtility::subscribe(const TarnReportingDriver& driver) {
   const plist::ValueView subGroup = textOf(driver.subGroupName());
   const auto channels = flume_.copyChannels(driver.groupName(), driver.subGroupName());
   if (channels.failed()) {
-    log(LogLevel::Error, "error %li getting channels for driver %@-%@", codeOf(channels.error), group, subGroup);
+    kLog(LogLevel::Error, "error %li getting channels for driver %@-%@", codeOf(channels.error), group, subGroup);
   }
   if (channels.value == nullptr || channels.value->empty()) {
-    log(LogLevel::Info, "couldn't find any channels for driver group %@-%@", group, subGroup);
+    kLog(LogLevel::Info, "couldn't find any channels for driver group %@-%@", group, subGroup);
     return;
   }
   auto made = TarnReportingIOChannelSubscription::initWithDriver(driver);
   const auto subscribed = flume_.subscribe(*channels.value);
   if (subscribed.subscription == nullptr || subscribed.channels == nullptr) {
-    log(LogLevel::Error, "error %li creating subscription for %@-%@", codeOf(subscribed.error), group, subGroup);
+    kLog(LogLevel::Error, "error %li creating subscription for %@-%@", codeOf(subscribed.error), group, subGroup);
     return;
   }
   made.subscription = subscribed.subscription;
   made.subscribedChannels = *subscribed.channels;
   ioChannelSubscriptions_.push_back(std::move(made));
-  log(LogLevel::Info, "subscribed to group group %@-%@", group, subGroup);
+  kLog(LogLevel::Info, "subscribed to group group %@-%@", group, subGroup);
 }
 
 TarnReportingDriverUtility::SnapShot TarnReportingDriverUtility::getSnapShot() const {
   SnapShot snapShot;
   for (const TarnReportingIOChannelSubscription& each : ioChannelSubscriptions_) {
     std::string driver = each.driver.description();
-    log(LogLevel::Info, "sampling driver %@", driver);
+    kLog(LogLevel::Info, "sampling driver %@", driver);
     auto samples = flume_.createSamples(*each.subscription, each.subscribedChannels);
     logSamplingError(samples.error);
     if (samples.value != nullptr) {
@@ -165,9 +160,9 @@ void TarnReportingDriverUtility::sendDriverLogsForSession(TarnReportingSession& 
                                                           const SnapShot& driverSnapShot) const {
   DriverStats stats;
   for (const TarnReportingIOChannelSubscription& each : ioChannelSubscriptions_) {
-    log(LogLevel::Info, "getting latest samples");
+    kLog(LogLevel::Info, "getting latest samples");
     auto samples = flume_.createSamples(*each.subscription, each.subscribedChannels);
-    log(LogLevel::Info, "done getting latest samples");
+    kLog(LogLevel::Info, "done getting latest samples");
     logSamplingError(samples.error);
     if (samples.value == nullptr) {
       continue;
@@ -194,11 +189,11 @@ void TarnReportingDriverUtility::process(const FlumeChannel& channel, DriverStat
       return processHistogramData(channel, stats.histogram);
     case FlumeFormat::Invalid:
     case FlumeFormat::SimpleArray:
-      return log(LogLevel::Debug, "Dropping sample of type : %hhu for group : %@ subgroup : %@",
-                 static_cast<unsigned>(channel.format), textOf(channel.name.group), textOf(channel.name.subGroup));
+      return kLog(LogLevel::Debug, "Dropping sample of type : %hhu for group : %@ subgroup : %@",
+                  static_cast<unsigned>(channel.format), textOf(channel.name.group), textOf(channel.name.subGroup));
   }
-  log(LogLevel::Error, "The FlumeFormat %hhu is not supported group : %@ subgroup : %@",
-      static_cast<unsigned>(channel.format), textOf(channel.name.group), textOf(channel.name.subGroup));
+  kLog(LogLevel::Error, "The FlumeFormat %hhu is not supported group : %@ subgroup : %@",
+       static_cast<unsigned>(channel.format), textOf(channel.name.group), textOf(channel.name.subGroup));
 }
 
 void TarnReportingDriverUtility::processSimpleData(const FlumeChannel& channel, plist::Dictionary& driverStats) {
@@ -214,7 +209,7 @@ void TarnReportingDriverUtility::processHistogramData(const FlumeChannel& channe
   std::string buckets;
   for (const platform::FlumeBucket& bucket : channel.buckets) {
     if (bucket.boundsError != 0) {
-      log(LogLevel::Info, "Error in getting the bucket bounds : %d", bucket.boundsError);
+      kLog(LogLevel::Info, "Error in getting the bucket bounds : %d", bucket.boundsError);
     }
     lower = std::min(lower, bucket.lower);
     upper = std::max(upper, bucket.upper);
@@ -247,7 +242,7 @@ void TarnReportingDriverUtility::processStateData(const FlumeChannel& channel, p
     }
   }
   if (!text.empty()) {
-    log(LogLevel::Debug, "the current reported data is : %@", text);
+    kLog(LogLevel::Debug, "the current reported data is : %@", text);
     driverStats.set(plist::Key(getDriverStatsKey(channel.name, "State")), text);
   }
 }

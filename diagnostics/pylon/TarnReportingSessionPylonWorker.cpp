@@ -17,7 +17,7 @@ namespace {
 
 using pylonmetrics::AudioIssueDetected;
 
-constexpr std::string_view kModule = "TarnReportingSessionPylonWorker";
+constexpr TarnReportingLogger kLog{TarnReportingPylonLogCategory, "TarnReportingSessionPylonWorker"};
 constexpr std::uint32_t kMetricIdentifier = 0x5B0003;
 
 // The record as the metric service asks for it.
@@ -54,8 +54,7 @@ std::int32_t lowBitsOf(const plist::ValueView& value) {
 plist::ValueView valueOf(const plist::Dictionary& message, const plist::Key& key) {
   const plist::ValueView value = message.get(key);
   if (!value) {
-    TarnReportingLog(TarnReportingPylonLogCategory(), LogLevel::Error, kModule,
-                     "Failed to get %@ for AudioIssueDetected", key.text());
+    kLog(LogLevel::Error, "Failed to get %@ for AudioIssueDetected", key.text());
   }
   return value;
 }

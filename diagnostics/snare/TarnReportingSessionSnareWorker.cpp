@@ -19,13 +19,8 @@ namespace tarn {
 
 namespace {
 
-constexpr std::string_view kModule = "TarnReportingSessionSnareWorker";
+constexpr TarnReportingLogger kLog{TarnReportingSnareLogCategory, "TarnReportingSessionSnareWorker"};
 constexpr std::string_view kHapticsCapability = "haptics";
-
-template <class... Arguments>
-void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
-  TarnReportingLog(TarnReportingSnareLogCategory(), level, kModule, text, arguments...);
-}
 
 }  // namespace
 
@@ -87,8 +82,8 @@ void TarnReportingSessionSnareWorker::handleInterest(const Member& member, const
   if (!owner) {
     return;
   }
-  log(LogLevel::Debug, "Interested in message. instance=%@, %@", member.instanceClass.name,
-      [&message] { return message.description(); });
+  kLog(LogLevel::Debug, "Interested in message. instance=%@, %@", member.instanceClass.name,
+       [&message] { return message.description(); });
   WorkerInstanceState& state = member.instance->workerState();
   const double now = TarnReportingFacilities().clock.epochSeconds();
   state.count(now);
@@ -108,7 +103,7 @@ void TarnReportingSessionSnareWorker::fire(const Member& member, const TarnRepor
   state.symptomReporter = TarnReportingFacilities().snare->createReporter();
   ++state.firedCount;
   if (session.serviceType() == AudioServiceType::Test) {
-    log(LogLevel::Info, "Skipping actual fire, as we are running in test mode.");
+    kLog(LogLevel::Info, "Skipping actual fire, as we are running in test mode.");
   } else {
     member.instanceClass.fire(*member.instance, message);
   }

@@ -11,23 +11,18 @@ namespace tarn {
 namespace {
 
 // They are the worker's operations, and its name is what people look for.
-constexpr std::string_view kModule = "TarnReportingSessionSnareWorker";
-
-template <class... Arguments>
-void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
-  TarnReportingLog(TarnReportingSnareLogCategory(), level, kModule, text, arguments...);
-}
+constexpr TarnReportingLogger kLog{TarnReportingSnareLogCategory, "TarnReportingSessionSnareWorker"};
 
 void logReason(std::int64_t code) {
   constexpr auto kReasons = static_cast<std::int64_t>(platform::kSnareReasonNames.size());
   if (code < 0 || code >= kReasons) {
-    log(LogLevel::Info, "Failed starting snare session. reason=%d", code);
+    kLog(LogLevel::Info, "Failed starting snare session. reason=%d", code);
     return;
   }
   // A failure without a reason is the service's own fault.
   const bool isNone = code == static_cast<std::int64_t>(platform::SnareReason::None);
-  log(isNone ? LogLevel::Error : LogLevel::Info, "Failed starting snare session. reason=kAilmentError%@",
-      platform::kSnareReasonNames[static_cast<std::size_t>(code)]);
+  kLog(isNone ? LogLevel::Error : LogLevel::Info, "Failed starting snare session. reason=kAilmentError%@",
+       platform::kSnareReasonNames[static_cast<std::size_t>(code)]);
 }
 
 }  // namespace
@@ -39,16 +34,16 @@ std::string TarnReportingSnareOperations::getSessionIdentifierFromResponse(
   if (reply.get(Keys::kSuccess) == plist::ValueView(true)) {
     const plist::ValueView identifier = reply.get(Keys::kSessionIdentifier);
     if (!identifier) {
-      log(LogLevel::Error, "Started Snare session, but no sessionId found!");
+      kLog(LogLevel::Error, "Started Snare session, but no sessionId found!");
       return kNoneReturned;
     }
-    log(LogLevel::Info, "Started Snare session. sessionId=%@", identifier);
+    kLog(LogLevel::Info, "Started Snare session. sessionId=%@", identifier);
     return identifier.asText();
   }
   if (const plist::ValueView reason = reply.get(Keys::kReasonCode)) {
     logReason(reason.asInt64());
   } else {
-    log(LogLevel::Error, "Failed starting snare session. Unknown reason.");
+    kLog(LogLevel::Error, "Failed starting snare session. Unknown reason.");
   }
   return kNoneReturned;
 }

@@ -10,12 +10,7 @@ namespace tarn {
 
 namespace {
 
-constexpr std::string_view kModule = "TarnReportingSnareWorkerInstanceAlarmLowRMS";
-
-template <class... Arguments>
-void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
-  TarnReportingLog(TarnReportingSnareLogCategory(), level, kModule, text, arguments...);
-}
+constexpr TarnReportingLogger kLog{TarnReportingSnareLogCategory, "TarnReportingSnareWorkerInstanceAlarmLowRMS"};
 
 std::optional<std::string> clientProcessNameOf(const TarnReportingSession& session) {
   return session.clientProcessName().empty() ? std::nullopt : std::optional(session.clientProcessName());
@@ -61,15 +56,15 @@ void TarnReportingSnareWorkerInstanceAlarmLowRMS::fire(const TarnReportingSessio
        timeout = snareAlarmLowRmsDuration_](const std::optional<plist::Dictionary>& reply) {
         const std::string sessionId = Operations::getSessionIdentifierFromResponse(reply);
         identifier->set(sessionId);
-        log(LogLevel::Info, "Started Snare session for alarm Low RMS. sessionId=%@ timeout=%f response=%@", sessionId,
-            timeout, reply ? plist::ValueView(*reply) : plist::ValueView());
+        kLog(LogLevel::Info, "Started Snare session for alarm Low RMS. sessionId=%@ timeout=%f response=%@", sessionId,
+             timeout, reply ? plist::ValueView(*reply) : plist::ValueView());
       });
   if (accepted) {
-    log(LogLevel::Info,
-        "Parameters to Snare session for alarm Low RMS accepted. Will fire if not cancelled. timeout=%f.",
-        snareAlarmLowRmsDuration_);
+    kLog(LogLevel::Info,
+         "Parameters to Snare session for alarm Low RMS accepted. Will fire if not cancelled. timeout=%f.",
+         snareAlarmLowRmsDuration_);
   } else {
-    log(LogLevel::Error, "Snare session for alarm Low RMS failed to start.");
+    kLog(LogLevel::Error, "Snare session for alarm Low RMS failed to start.");
   }
 }
 
@@ -78,8 +73,8 @@ void TarnReportingSnareWorkerInstanceAlarmLowRMS::stop() {
   if (!sessionId) {
     return;
   }
-  log(LogLevel::Info, "Stop called. Cancelling Snare session for alarm Low RMS. sessionId=%@ timeout=%f", *sessionId,
-      snareAlarmLowRmsDuration_);
+  kLog(LogLevel::Info, "Stop called. Cancelling Snare session for alarm Low RMS. sessionId=%@ timeout=%f", *sessionId,
+       snareAlarmLowRmsDuration_);
   workerState().symptomReporter->cancelSession(*sessionId);
 }
 

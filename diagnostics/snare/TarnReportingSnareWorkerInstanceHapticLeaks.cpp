@@ -11,13 +11,8 @@ namespace tarn {
 
 namespace {
 
-constexpr std::string_view kModule = "TarnReportingSnareWorkerInstanceHapticLeaks";
+constexpr TarnReportingLogger kLog{TarnReportingSnareLogCategory, "TarnReportingSnareWorkerInstanceHapticLeaks"};
 constexpr double kSnapshotSeconds = 0;
-
-template <class... Arguments>
-void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
-  TarnReportingLog(TarnReportingSnareLogCategory(), level, kModule, text, arguments...);
-}
 
 std::shared_ptr<WorkerInstanceState> makeState() {
   auto state = std::make_shared<WorkerInstanceState>();
@@ -53,13 +48,13 @@ void TarnReportingSnareWorkerInstanceHapticLeaks::fire(const TarnReportingSessio
       [identifier = workerState().currentSnareSessionIdentifier](const std::optional<plist::Dictionary>& reply) {
         const std::string sessionId = Operations::getSessionIdentifierFromResponse(reply);
         identifier->set(sessionId);
-        log(LogLevel::Info, "Started Snare session for haptics leaks. sessionId=%@ response=%@", sessionId,
-            reply ? plist::ValueView(*reply) : plist::ValueView());
+        kLog(LogLevel::Info, "Started Snare session for haptics leaks. sessionId=%@ response=%@", sessionId,
+             reply ? plist::ValueView(*reply) : plist::ValueView());
       });
   if (accepted) {
-    log(LogLevel::Info, "Parameters to Snare session accepted.");
+    kLog(LogLevel::Info, "Parameters to Snare session accepted.");
   } else {
-    log(LogLevel::Error, "Parameters to Snare session not accepted!");
+    kLog(LogLevel::Error, "Parameters to Snare session not accepted!");
   }
 }
 

@@ -17,14 +17,9 @@ namespace tarn {
 
 namespace {
 
-constexpr std::string_view kModule = "TarnReportingSnareWorkerInstanceSSSLeaks";
+constexpr TarnReportingLogger kLog{TarnReportingSnareLogCategory, "TarnReportingSnareWorkerInstanceSSSLeaks"};
 constexpr double kSnapshotSeconds = 0;
 constexpr double kSecondsBetweenFires = 15.0;
-
-template <class... Arguments>
-void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
-  TarnReportingLog(TarnReportingSnareLogCategory(), level, kModule, text, arguments...);
-}
 
 std::shared_ptr<WorkerInstanceState> makeState() {
   auto state = std::make_shared<WorkerInstanceState>();
@@ -67,7 +62,7 @@ void TarnReportingSnareWorkerInstanceSSSLeaks::fire(const TarnReportingSessionMe
   const std::lock_guard guard(limit.lock);
   const double now = TarnReportingFacilities().clock.epochSeconds();
   if (firedRecently(limit.lastFire, now)) {
-    log(LogLevel::Info, "Already fired TarnReportingSnareWorkerInstanceSSSLeaks recently.");
+    kLog(LogLevel::Info, "Already fired TarnReportingSnareWorkerInstanceSSSLeaks recently.");
     return;
   }
   limit.lastFire = now;
@@ -84,13 +79,13 @@ void TarnReportingSnareWorkerInstanceSSSLeaks::requestSnapshot(const TarnReporti
       [identifier = workerState().currentSnareSessionIdentifier](const std::optional<plist::Dictionary>& reply) {
         const std::string sessionId = Operations::getSessionIdentifierFromResponse(reply);
         identifier->set(sessionId);
-        log(LogLevel::Info, "Started Snare session for system sound server leaks. sessionId=%@ response=%@", sessionId,
-            reply ? plist::ValueView(*reply) : plist::ValueView());
+        kLog(LogLevel::Info, "Started Snare session for system sound server leaks. sessionId=%@ response=%@", sessionId,
+             reply ? plist::ValueView(*reply) : plist::ValueView());
       });
   if (accepted) {
-    log(LogLevel::Info, "Parameters to Snare session accepted.");
+    kLog(LogLevel::Info, "Parameters to Snare session accepted.");
   } else {
-    log(LogLevel::Error, "Parameters to Snare session not accepted!");
+    kLog(LogLevel::Error, "Parameters to Snare session not accepted!");
   }
 }
 

@@ -36,7 +36,7 @@ std::optional<std::string> JournalLog::unavailable() {
 
 void JournalLog::write(const platform::LogEntry& entry) noexcept {
   try {
-    const std::lock_guard lock(mutex_);
+    const platform::MutexLock lock(mutex_);
     int error = 0;
     if (lost_ > 0) {
       constexpr std::string_view kModule = "JournalLog";
@@ -54,7 +54,7 @@ void JournalLog::write(const platform::LogEntry& entry) noexcept {
       lostError_ = error;
     }
   } catch (const std::exception&) {  // no memory for the fields
-    const std::lock_guard lock(mutex_);
+    const platform::MutexLock lock(mutex_);
     ++lost_;
     lostError_ = ENOMEM;
   }

@@ -14,11 +14,11 @@
 #include <sys/uio.h>
 
 #include <cstdint>
-#include <mutex>
 #include <optional>
 #include <string>
 
 #include "platform/Log.h"
+#include "platform/ThreadSafety.h"
 
 namespace tarn::linux_host {
 
@@ -41,9 +41,9 @@ class JournalLog final : public platform::Log {
   int sendEntry(const platform::LogEntry& entry);
 
   const Send send_;
-  std::mutex mutex_;
-  std::uint64_t lost_ = 0;  // entries lost and not yet told; guarded by mutex_, as is lostError_
-  int lostError_ = 0;
+  platform::Mutex mutex_;
+  std::uint64_t lost_ TARN_GUARDED_BY(mutex_) = 0;
+  int lostError_ TARN_GUARDED_BY(mutex_) = 0;
 };
 
 }  // namespace tarn::linux_host

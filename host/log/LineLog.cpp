@@ -27,7 +27,7 @@ LineLog::LineLog(const platform::Clock& clock, platform::LogLevel threshold) : c
 void LineLog::write(const platform::LogEntry& entry) noexcept {
   try {
     const std::string line = logLine(clock_.epochSeconds(), entry);
-    const std::lock_guard lock(mutex_);
+    const platform::MutexLock lock(mutex_);
     int error = lost_ == 0 ? 0 : writeLost();
     if (error == 0) {
       error = writeWhole(line);
@@ -37,7 +37,7 @@ void LineLog::write(const platform::LogEntry& entry) noexcept {
       lostError_ = error;
     }
   } catch (const std::exception&) {  // no memory for a line
-    const std::lock_guard lock(mutex_);
+    const platform::MutexLock lock(mutex_);
     ++lost_;
     lostError_ = ENOMEM;
   }
@@ -66,7 +66,7 @@ int LineLog::writeWhole(std::string_view line) {
     line = mended;
   }
   std::string_view left = line;
-  const auto failed = [&](int error) {
+  const auto failed = [&](int error) TARN_REQUIRES(mutex_) {
     torn_ = torn_ ? left.size() + 1 != line.size() : left.size() != line.size();
     return error;
   };

@@ -8,12 +8,12 @@
 #pragma once
 
 #include <cstdint>
-#include <mutex>
 #include <string>
 #include <string_view>
 
 #include "platform/Clock.h"
 #include "platform/Log.h"
+#include "platform/ThreadSafety.h"
 
 namespace tarn::linux_host {
 
@@ -33,16 +33,16 @@ class LineLog : public platform::Log {
   void setMayStall(bool mayStall) noexcept { mayStall_ = mayStall; }
 
  private:
-  int writeWhole(std::string_view line);
-  int writeLost();
-  bool waitForRoom(int target) const;
+  int writeWhole(std::string_view line) TARN_REQUIRES(mutex_);
+  int writeLost() TARN_REQUIRES(mutex_);
+  bool waitForRoom(int target) const TARN_REQUIRES(mutex_);
 
   const platform::Clock& clock_;
   bool mayStall_ = false;  // constant after construction
-  std::mutex mutex_;
-  std::uint64_t lost_ = 0;  // lines lost and not yet told; guarded by mutex_, as are all below
-  int lostError_ = 0;
-  bool torn_ = false;  // the last line was cut off in the middle
+  platform::Mutex mutex_;
+  std::uint64_t lost_ TARN_GUARDED_BY(mutex_) = 0;
+  int lostError_ TARN_GUARDED_BY(mutex_) = 0;
+  bool torn_ TARN_GUARDED_BY(mutex_) = false;  // the last line was cut off in the middle
 };
 
 // The standard error stream, or another descriptor that is open already. It isn't closed.

@@ -22,7 +22,7 @@ ServerQueue::ServerQueue(const platform::Clock& clock, QueueProgress& progress)
 void ServerQueue::async(platform::Work work) {
   bool wakeServer = false;
   {
-    const std::lock_guard lock(mutex_);
+    const platform::MutexLock lock(mutex_);
     incoming_.push_back(std::move(work));
     ready_.fetch_add(1, std::memory_order_relaxed);
     wakeServer = mustWake();
@@ -40,7 +40,7 @@ void ServerQueue::asyncAfter(std::chrono::nanoseconds delay, platform::Work work
   const auto deadline = deadlineAfter(clock_.monotonic(), delay);
   bool wakeServer = false;
   {
-    const std::lock_guard lock(mutex_);
+    const platform::MutexLock lock(mutex_);
     delayed_.add(deadline, std::move(work));
     wakeServer = deadline < sleepsUntil_ && mustWake();
   }
@@ -54,14 +54,14 @@ bool ServerQueue::isCurrent() const noexcept {
 }
 
 std::size_t ServerQueue::waiting() const noexcept {
-  const std::lock_guard lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   return ready() + (delayed_.empty() ? 0 : delayed_.dueCount(clock_.monotonic()));
 }
 
 void ServerQueue::wake() {
   bool wakeServer = false;
   {
-    const std::lock_guard lock(mutex_);
+    const platform::MutexLock lock(mutex_);
     lookAround_ = true;
     wakeServer = mustWake();
   }
@@ -89,7 +89,7 @@ bool ServerQueue::refill() {
   if (batch_.capacity() > kKeptPieces) {
     batch_ = std::vector<platform::Work>();
   }
-  const std::lock_guard lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   if (!delayed_.empty()) {
     const auto now = clock_.monotonic();
     while (delayed_.due(now)) {
@@ -106,7 +106,7 @@ std::optional<std::chrono::nanoseconds> ServerQueue::prepareToSleep() {
   if (ready() != 0) {
     return nanoseconds::zero();
   }
-  const std::lock_guard lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   if (ready() != 0 || std::exchange(lookAround_, false)) {
     return nanoseconds::zero();
   }
@@ -125,7 +125,7 @@ std::optional<std::chrono::nanoseconds> ServerQueue::prepareToSleep() {
 }
 
 bool ServerQueue::prepareToWait() {
-  const std::lock_guard lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   if (std::exchange(lookAround_, false)) {
     return false;
   }
@@ -135,7 +135,7 @@ bool ServerQueue::prepareToWait() {
 }
 
 void ServerQueue::awake() {
-  const std::lock_guard lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   sleeping_ = false;
 }
 

@@ -15,7 +15,6 @@
 
 #include <atomic>
 #include <cstddef>
-#include <mutex>
 #include <optional>
 #include <vector>
 
@@ -23,6 +22,7 @@
 #include "host/loop/QueueProgress.h"
 #include "host/system/UniqueDescriptor.h"
 #include "platform/Clock.h"
+#include "platform/ThreadSafety.h"
 #include "platform/WorkQueue.h"
 
 namespace tarn::linux_host {
@@ -60,8 +60,8 @@ class ServerQueue final : public platform::WorkQueue {
 
  private:
   bool refill();
-  // Under the lock: whether the caller must write the wake descriptor after letting go of the lock.
-  bool mustWake() noexcept;
+  // Whether the caller must write the wake descriptor after letting go of the lock.
+  bool mustWake() noexcept TARN_REQUIRES(mutex_);
   void writeWake() noexcept;
 
   const platform::Clock& clock_;
@@ -74,12 +74,12 @@ class ServerQueue final : public platform::WorkQueue {
   std::vector<platform::Work> batch_;
   std::size_t next_ = 0;
 
-  mutable std::mutex mutex_;  // guards what follows
-  std::vector<platform::Work> incoming_;
-  DelayedWork<platform::Work> delayed_;
-  bool sleeping_ = false;
-  bool lookAround_ = false;  // wake() was called and no turn has begun since
-  std::chrono::nanoseconds sleepsUntil_{};
+  mutable platform::Mutex mutex_;
+  std::vector<platform::Work> incoming_ TARN_GUARDED_BY(mutex_);
+  DelayedWork<platform::Work> delayed_ TARN_GUARDED_BY(mutex_);
+  bool sleeping_ TARN_GUARDED_BY(mutex_) = false;
+  bool lookAround_ TARN_GUARDED_BY(mutex_) = false;  // wake() was called and no turn has begun since
+  std::chrono::nanoseconds sleepsUntil_ TARN_GUARDED_BY(mutex_){};
 };
 
 }  // namespace tarn::linux_host

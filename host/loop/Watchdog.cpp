@@ -23,10 +23,10 @@ void Watchdog::start() {
 
 void Watchdog::stop() {
   {
-    const std::lock_guard lock(mutex_);
+    const platform::MutexLock lock(mutex_);
     stopping_ = true;
   }
-  changed_.notify_all();
+  changed_.notifyAll();
   if (thread_.joinable()) {
     thread_.join();
   }
@@ -43,12 +43,13 @@ bool Watchdog::check() {
 }
 
 void Watchdog::serve(std::chrono::microseconds period) {
-  std::unique_lock lock(mutex_);
-  while (!changed_.wait_for(lock, period, [this] { return stopping_; })) {
-    lock.unlock();
+  mutex_.lock();
+  while (!changed_.waitFor(mutex_, period, [this]() TARN_REQUIRES(mutex_) { return stopping_; })) {
+    mutex_.unlock();
     check();
-    lock.lock();
+    mutex_.lock();
   }
+  mutex_.unlock();
 }
 
 }  // namespace tarn::linux_host

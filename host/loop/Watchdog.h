@@ -5,13 +5,12 @@
 #pragma once
 
 #include <chrono>
-#include <condition_variable>
-#include <mutex>
 #include <thread>
 
 #include "host/loop/QueueProgress.h"
 #include "host/loop/ServiceManager.h"
 #include "platform/Clock.h"
+#include "platform/ThreadSafety.h"
 
 namespace tarn::linux_host {
 
@@ -44,9 +43,9 @@ class Watchdog {
   const QueueProgress& progress_;
   ServiceManager& manager_;
   QueueProgress::Sample before_;  // of the last look
-  std::mutex mutex_;
-  std::condition_variable changed_;
-  bool stopping_ = false;  // guarded by mutex_
+  platform::Mutex mutex_;
+  platform::ConditionVariable changed_;
+  bool stopping_ TARN_GUARDED_BY(mutex_) = false;
   std::thread thread_;
 };
 

@@ -37,7 +37,7 @@ void runOne(WorkerPool::Line& line, platform::Work work) {
 }  // namespace
 
 void WorkerPool::start(std::size_t threads) {
-  const std::lock_guard lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   if (!threads_.empty() || stopping_) {
     return;
   }
@@ -53,12 +53,12 @@ void WorkerPool::start(std::size_t threads) {
 void WorkerPool::stop() {
   std::vector<std::thread> threads;
   {
-    const std::lock_guard lock(mutex_);
+    const platform::MutexLock lock(mutex_);
     stopping_ = true;
     threads.swap(threads_);
   }
-  changed_.notify_all();
-  ended_.notify_all();
+  changed_.notifyAll();
+  ended_.notifyAll();
   for (std::thread& thread : threads) {
     thread.join();
   }
@@ -70,7 +70,7 @@ void WorkerPool::destroyWhatIsLeft() {
   // Destroyed behind the lock: its end may come back here.
   std::vector<platform::Work> left;
   DelayedWork<Delayed> delayed;
-  const std::lock_guard lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   over_ = true;
   std::swap(delayed, delayed_);
   for (auto& [moment, line] : suspensions_) {
@@ -86,18 +86,18 @@ void WorkerPool::destroyWhatIsLeft() {
 }
 
 void WorkerPool::add(const std::shared_ptr<Line>& line, platform::Work work, Urgency urgency) {
-  const std::lock_guard lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   if (over_) {
     return;
   }
   enqueue(line, std::move(work));
   if (urgency == Urgency::AtOnce && looking_) {
-    ended_.notify_one();
+    ended_.notifyOne();
   }
 }
 
 void WorkerPool::addAfter(const std::shared_ptr<Line>& line, nanoseconds delay, platform::Work work) {
-  const std::lock_guard lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   if (over_) {
     return;
   }
@@ -111,7 +111,7 @@ void WorkerPool::addAfter(const std::shared_ptr<Line>& line, nanoseconds delay, 
 
 void WorkerPool::suspend(const std::shared_ptr<Line>& line, nanoseconds longest, platform::Work next) {
   line->interrupted = true;
-  const std::lock_guard lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   const auto moment = deadlineAfter(clock_.monotonic(), std::max(longest, nanoseconds::zero()));
   line->next = std::move(next);
   line->suspension = suspensions_.emplace(std::pair(moment, nextSuspension_++), line).first;
@@ -120,7 +120,7 @@ void WorkerPool::suspend(const std::shared_ptr<Line>& line, nanoseconds longest,
 }
 
 void WorkerPool::resume(const std::shared_ptr<Line>& line) {
-  const std::lock_guard lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   if (line->suspension) {
     endSuspension(*line->suspension);
   }
@@ -130,25 +130,26 @@ void WorkerPool::help(const std::shared_ptr<Line>& line, nanoseconds longest) {
   if (CurrentQueue::is(line.get())) {
     return;
   }
-  Lock lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   ++helpers_;
-  turnEnded_.wait_for(lock, longest, [&line] { return !line->running; });
+  turnEnded_.waitFor(mutex_, longest, [&line] { return !line->running; });
   --helpers_;
   const auto place = std::find(runnable_.begin(), runnable_.end(), line);
   if (place != runnable_.end()) {
     runnable_.erase(place);
-    runSome(line, lock);
+    runSome(line);
   }
 }
 
 std::size_t WorkerPool::unfinished() const {
-  const std::lock_guard lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   return unfinished_;
 }
 
 bool WorkerPool::settle(nanoseconds longest) {
-  Lock lock(mutex_);
-  return settled_.wait_for(lock, std::min(longest, kLongestSleep), [this] { return unfinished_ == 0; });
+  const platform::MutexLock lock(mutex_);
+  return settled_.waitFor(mutex_, std::min(longest, kLongestSleep),
+                          [this]() TARN_REQUIRES(mutex_) { return unfinished_ == 0; });
 }
 
 void WorkerPool::enqueue(const std::shared_ptr<Line>& line, platform::Work work) {
@@ -211,7 +212,7 @@ std::optional<nanoseconds> WorkerPool::nextMoment() const {
 
 void WorkerPool::wakeOne() {
   if (!wakeUps_.empty()) {
-    changed_.notify_one();
+    changed_.notifyOne();
   }
 }
 
@@ -224,7 +225,7 @@ void WorkerPool::watchNextMoment() {
 }
 
 void WorkerPool::serve() {
-  Lock lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   bool worked = false;
   for (;;) {
     takeDue();
@@ -238,39 +239,39 @@ void WorkerPool::serve() {
         watchNextMoment();
       }
       worked = true;
-      runSome(line, lock);
+      runSome(line);
     } else if (stopping_) {
       return;
     } else if (std::exchange(worked, false) && !looking_) {
-      look(lock);
+      look();
     } else {
-      sleep(lock);
+      sleep();
     }
   }
 }
 
-void WorkerPool::look(Lock& lock) {
+void WorkerPool::look() {
   looking_ = true;
   auto longest = kLookAgain;
   if (const auto moment = nextMoment()) {
     longest = std::min(longest, *moment - clock_.monotonic());
   }
-  ended_.wait_for(lock, longest);
+  ended_.waitFor(mutex_, longest);
   looking_ = false;
 }
 
-void WorkerPool::sleep(Lock& lock) {
+void WorkerPool::sleep() {
   const auto moment = nextMoment();
   const auto wakeUp = wakeUps_.insert(moment.value_or(nanoseconds::max()));
   if (moment) {
-    changed_.wait_for(lock, std::min(*moment - clock_.monotonic(), kLongestSleep));
+    changed_.waitFor(mutex_, std::min(*moment - clock_.monotonic(), kLongestSleep));
   } else {
-    changed_.wait(lock);
+    changed_.wait(mutex_);
   }
   wakeUps_.erase(wakeUp);
 }
 
-void WorkerPool::runSome(const std::shared_ptr<Line>& line, Lock& lock) {
+void WorkerPool::runSome(const std::shared_ptr<Line>& line) {
   line->running = true;
   platform::Work next = std::move(line->next);
   if (line->position == line->taken.size()) {
@@ -278,19 +279,19 @@ void WorkerPool::runSome(const std::shared_ptr<Line>& line, Lock& lock) {
     line->position = 0;
     line->taken.swap(line->incoming);
   }
-  lock.unlock();
+  mutex_.unlock();
   const std::size_t finished = runTurn(*line, std::move(next));
-  lock.lock();
+  mutex_.lock();
   line->running = false;
   if (helpers_ > 0) {
-    turnEnded_.notify_all();
+    turnEnded_.notifyAll();
   }
   const bool more = line->next || line->position < line->taken.size() || !line->incoming.empty();
   line->scheduled = more && !line->suspension;
   if (line->scheduled) {
     runnable_.push_back(line);
   }
-  account(finished, lock);
+  account(finished);
 }
 
 std::size_t WorkerPool::runTurn(Line& line, platform::Work next) {
@@ -312,15 +313,15 @@ std::size_t WorkerPool::runTurn(Line& line, platform::Work next) {
   return finished;
 }
 
-void WorkerPool::account(std::size_t finished, Lock& lock) {
+void WorkerPool::account(std::size_t finished) {
   unfinished_ -= finished;
   if (unfinished_ == 0) {
-    settled_.notify_all();
+    settled_.notifyAll();
   }
   if (unfinished_ <= marks_.low && full_.exchange(false, std::memory_order_relaxed) && roomHandler_) {
-    lock.unlock();
+    mutex_.unlock();
     roomHandler_();
-    lock.lock();
+    mutex_.lock();
   }
 }
 

@@ -15,13 +15,11 @@
 
 #include <atomic>
 #include <chrono>
-#include <condition_variable>
 #include <cstddef>
 #include <cstdint>
 #include <deque>
 #include <map>
 #include <memory>
-#include <mutex>
 #include <optional>
 #include <set>
 #include <thread>
@@ -30,6 +28,7 @@
 
 #include "host/loop/DelayedWork.h"
 #include "platform/Clock.h"
+#include "platform/ThreadSafety.h"
 #include "platform/WorkQueue.h"
 
 namespace tarn::linux_host {
@@ -78,7 +77,6 @@ class WorkerPool {
   [[nodiscard]] bool settle(std::chrono::nanoseconds longest);
 
  private:
-  using Lock = std::unique_lock<std::mutex>;
   using Delayed = std::pair<std::shared_ptr<Line>, platform::Work>;
   // By deadline, equal ones in the order of the calls.
   using Suspensions = std::map<std::pair<std::chrono::nanoseconds, std::uint64_t>, std::shared_ptr<Line>>;
@@ -86,40 +84,40 @@ class WorkerPool {
   void serve();
   void destroyWhatIsLeft();
   static std::size_t runTurn(Line& line, platform::Work next);
-  // Under the lock.
-  void enqueue(const std::shared_ptr<Line>& line, platform::Work work);
-  void schedule(const std::shared_ptr<Line>& line);
-  void endSuspension(Suspensions::iterator suspension);
-  void takeDue();
-  std::optional<std::chrono::nanoseconds> nextMoment() const;
-  void countUnfinished();
-  void wakeOne();
-  void watchNextMoment();
-  void look(Lock& lock);
-  void sleep(Lock& lock);
-  void runSome(const std::shared_ptr<Line>& line, Lock& lock);
-  void account(std::size_t finished, Lock& lock);
+  void enqueue(const std::shared_ptr<Line>& line, platform::Work work) TARN_REQUIRES(mutex_);
+  void schedule(const std::shared_ptr<Line>& line) TARN_REQUIRES(mutex_);
+  void endSuspension(Suspensions::iterator suspension) TARN_REQUIRES(mutex_);
+  void takeDue() TARN_REQUIRES(mutex_);
+  std::optional<std::chrono::nanoseconds> nextMoment() const TARN_REQUIRES(mutex_);
+  void countUnfinished() TARN_REQUIRES(mutex_);
+  void wakeOne() TARN_REQUIRES(mutex_);
+  void watchNextMoment() TARN_REQUIRES(mutex_);
+  void look() TARN_REQUIRES(mutex_);
+  void sleep() TARN_REQUIRES(mutex_);
+  void runSome(const std::shared_ptr<Line>& line) TARN_REQUIRES(mutex_);
+  void account(std::size_t finished) TARN_REQUIRES(mutex_);
 
   const platform::Clock& clock_;
   const Marks marks_;
   RoomHandler roomHandler_;
   std::atomic<bool> full_{false};
-  mutable std::mutex mutex_;         // guards what follows, and of the lines what they say
-  std::condition_variable changed_;  // for the sleepers
-  std::condition_variable ended_;    // for the one that is about to look
-  std::condition_variable settled_;
-  std::condition_variable turnEnded_;  // for those who help
-  std::size_t helpers_ = 0;
-  std::deque<std::shared_ptr<Line>> runnable_;
-  DelayedWork<Delayed> delayed_;
-  Suspensions suspensions_;
-  std::uint64_t nextSuspension_ = 0;
-  std::size_t unfinished_ = 0;
-  std::vector<std::thread> threads_;
-  std::multiset<std::chrono::nanoseconds> wakeUps_;  // of the sleepers: when each wakes at the latest
-  bool looking_ = false;
-  bool stopping_ = false;
-  bool over_ = false;  // the threads are gone
+  mutable platform::Mutex mutex_;        // guards of the lines, too, what they say
+  platform::ConditionVariable changed_;  // for the sleepers
+  platform::ConditionVariable ended_;    // for the one that is about to look
+  platform::ConditionVariable settled_;
+  platform::ConditionVariable turnEnded_;  // for those who help
+  std::size_t helpers_ TARN_GUARDED_BY(mutex_) = 0;
+  std::deque<std::shared_ptr<Line>> runnable_ TARN_GUARDED_BY(mutex_);
+  DelayedWork<Delayed> delayed_ TARN_GUARDED_BY(mutex_);
+  Suspensions suspensions_ TARN_GUARDED_BY(mutex_);
+  std::uint64_t nextSuspension_ TARN_GUARDED_BY(mutex_) = 0;
+  std::size_t unfinished_ TARN_GUARDED_BY(mutex_) = 0;
+  std::vector<std::thread> threads_ TARN_GUARDED_BY(mutex_);
+  // Of the sleepers: when each wakes at the latest.
+  std::multiset<std::chrono::nanoseconds> wakeUps_ TARN_GUARDED_BY(mutex_);
+  bool looking_ TARN_GUARDED_BY(mutex_) = false;
+  bool stopping_ TARN_GUARDED_BY(mutex_) = false;
+  bool over_ TARN_GUARDED_BY(mutex_) = false;  // the threads are gone
 };
 
 // The state of one queue. Lives as long as the queue or work for it.

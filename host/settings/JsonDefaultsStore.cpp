@@ -70,7 +70,7 @@ JsonDefaultsStore::Suite JsonDefaultsStore::suite(std::string_view name) const {
   const std::string path = pathOf(name);
   struct stat facts {};
   const Stamp now = stampOf(::stat(path.c_str(), &facts), facts);
-  const std::lock_guard lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   auto at = cache_.find(name);
   if (at == cache_.end()) {
     if (cache_.size() == kMaximumCachedSuites) {

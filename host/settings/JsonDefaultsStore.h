@@ -20,11 +20,11 @@
 #include <cstddef>
 #include <cstdint>
 #include <map>
-#include <mutex>
 #include <string>
 
 #include "platform/DefaultsStore.h"
 #include "platform/Log.h"
+#include "platform/ThreadSafety.h"
 #include "plist/Dictionary.h"
 
 namespace tarn::linux_host {
@@ -84,8 +84,8 @@ class JsonDefaultsStore final : public platform::DefaultsStore {
   const std::string folder_;
   platform::Log& log_;
   const std::chrono::milliseconds lockPatience_;
-  mutable std::mutex mutex_;
-  mutable std::map<std::string, Cached, std::less<>> cache_;  // guarded by mutex_
+  mutable platform::Mutex mutex_;
+  mutable std::map<std::string, Cached, std::less<>> cache_ TARN_GUARDED_BY(mutex_);
 };
 
 }  // namespace tarn::linux_host

@@ -4,12 +4,12 @@
 #pragma once
 
 #include <memory>
-#include <mutex>
 #include <vector>
 
 #include "host/traces/SignpostBuffer.h"
 #include "platform/Clock.h"
 #include "platform/Signposts.h"
+#include "platform/ThreadSafety.h"
 
 namespace tarn::linux_host {
 
@@ -31,8 +31,8 @@ class LinuxSignposts final : public platform::Signposts {
   void take(const SignpostRecord& record) noexcept;
 
   const platform::Clock& clock_;
-  std::mutex mutex_;
-  std::vector<std::shared_ptr<SignpostBuffer>> buffers_;  // guarded by mutex_
+  platform::Mutex mutex_;
+  std::vector<std::shared_ptr<SignpostBuffer>> buffers_ TARN_GUARDED_BY(mutex_);
 };
 
 }  // namespace tarn::linux_host

@@ -8,10 +8,10 @@
 #include <cstddef>
 #include <cstdint>
 #include <functional>
-#include <mutex>
 #include <vector>
 
 #include "platform/Signposts.h"
+#include "platform/ThreadSafety.h"
 
 namespace tarn::linux_host {
 
@@ -43,9 +43,9 @@ class SignpostBuffer {
   const std::size_t mostRecords_;
   const std::chrono::nanoseconds since_;
   const std::function<void()> halfFull_;
-  std::mutex mutex_;
-  std::vector<SignpostRecord> records_;  // guarded by mutex_
-  std::uint64_t lost_ = 0;               // guarded by mutex_
+  platform::Mutex mutex_;
+  std::vector<SignpostRecord> records_ TARN_GUARDED_BY(mutex_);
+  std::uint64_t lost_ TARN_GUARDED_BY(mutex_) = 0;
 };
 
 }  // namespace tarn::linux_host

@@ -41,24 +41,24 @@ TraceRecording::TraceRecording(const TraceParts& parts, const PerformanceTraceLi
       token_("trace-" + std::to_string(number)) {}
 
 void TraceRecording::setDelegate(std::weak_ptr<platform::PerformanceTraceDelegate> delegate) {
-  const std::lock_guard lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   delegate_ = std::move(delegate);
 }
 
 bool TraceRecording::isValid() const {
-  const std::lock_guard lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   return state_ == State::Valid;
 }
 
 bool TraceRecording::askForStart() {
-  const std::lock_guard lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   if (state_ != State::New) return false;
   state_ = State::Valid;
   return true;
 }
 
 bool TraceRecording::askForStop() {
-  const std::lock_guard lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   if (state_ != State::Valid) return false;
   state_ = State::Over;
   return true;
@@ -66,7 +66,7 @@ bool TraceRecording::askForStop() {
 
 void TraceRecording::release() noexcept {
   {
-    const std::lock_guard lock(mutex_);
+    const platform::MutexLock lock(mutex_);
     released_ = true;
     state_ = State::Over;
   }
@@ -82,7 +82,7 @@ void TraceRecording::start(bool hasRoom, std::function<void()> wake) {
   }
   if (error) {
     file_.reset();
-    const std::lock_guard lock(mutex_);
+    const platform::MutexLock lock(mutex_);
     state_ = State::Over;
   } else if (!beginRecording(std::move(wake))) {
     file_.reset();
@@ -94,7 +94,7 @@ void TraceRecording::start(bool hasRoom, std::function<void()> wake) {
 void TraceRecording::drain() {
   std::shared_ptr<SignpostBuffer> buffer;
   {
-    const std::lock_guard lock(mutex_);
+    const platform::MutexLock lock(mutex_);
     buffer = buffer_;
   }
   if (!isOpen() || buffer == nullptr || failure_) return;
@@ -140,7 +140,7 @@ MaybeError TraceRecording::openFile() {
 
 // Whether the session still wants it.
 bool TraceRecording::beginRecording(std::function<void()> wake) {
-  const std::lock_guard lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   if (released_) return false;
   buffer_ = std::make_shared<SignpostBuffer>(limits_.mostBufferedEvents, parts_.clock.monotonic(), std::move(wake));
   parts_.signposts.add(buffer_);  // locked: or a release right now would come before it
@@ -148,7 +148,7 @@ bool TraceRecording::beginRecording(std::function<void()> wake) {
 }
 
 void TraceRecording::endRecording() noexcept {
-  const std::lock_guard lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   if (buffer_ != nullptr) parts_.signposts.remove(buffer_.get());
 }
 
@@ -172,7 +172,7 @@ template <class Call>
 void TraceRecording::tell(const Call& call) {
   std::shared_ptr<platform::PerformanceTraceDelegate> delegate;
   {
-    const std::lock_guard lock(mutex_);
+    const platform::MutexLock lock(mutex_);
     if (!released_) delegate = delegate_.lock();
   }
   if (delegate != nullptr) call(*delegate);

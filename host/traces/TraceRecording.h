@@ -10,7 +10,6 @@
 #include <cstdint>
 #include <functional>
 #include <memory>
-#include <mutex>
 #include <string>
 #include <vector>
 
@@ -21,6 +20,7 @@
 #include "platform/Log.h"
 #include "platform/PerformanceTraceService.h"
 #include "platform/ProcessFacts.h"
+#include "platform/ThreadSafety.h"
 
 namespace tarn::linux_host {
 
@@ -97,12 +97,11 @@ class TraceRecording {
   platform::MaybeError failure_;  // of the disk
 
   std::atomic<std::uint64_t> leftOut_{0};  // set before the completion
-  mutable std::mutex mutex_;
-  // Guarded by mutex_.
-  std::weak_ptr<platform::PerformanceTraceDelegate> delegate_;
-  std::shared_ptr<SignpostBuffer> buffer_;  // set once, when recording begins
-  State state_ = State::New;
-  bool released_ = false;
+  mutable platform::Mutex mutex_;
+  std::weak_ptr<platform::PerformanceTraceDelegate> delegate_ TARN_GUARDED_BY(mutex_);
+  std::shared_ptr<SignpostBuffer> buffer_ TARN_GUARDED_BY(mutex_);  // set once, when recording begins
+  State state_ TARN_GUARDED_BY(mutex_) = State::New;
+  bool released_ TARN_GUARDED_BY(mutex_) = false;
 };
 
 }  // namespace tarn::linux_host

@@ -8,7 +8,7 @@
 namespace tarn::linux_host {
 
 bool TraceThread::run() {
-  const std::lock_guard lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   if (ended_) return false;
   if (thread_.joinable()) return true;
   try {
@@ -21,51 +21,51 @@ bool TraceThread::run() {
 }
 
 void TraceThread::post(Verb verb, std::shared_ptr<TraceRecording> recording) {
-  const std::lock_guard lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   if (ended_) return;
   commands_.push_back({verb, std::move(recording)});
-  changed_.notify_one();
+  changed_.notifyOne();
 }
 
 void TraceThread::end() {
   std::thread thread;
   {
-    const std::lock_guard lock(mutex_);
+    const platform::MutexLock lock(mutex_);
     ended_ = true;
     thread = std::move(thread_);
-    changed_.notify_one();
+    changed_.notifyOne();
   }
   if (thread.joinable()) thread.join();
 }
 
 void TraceThread::work() {
-  std::unique_lock lock(mutex_);
+  mutex_.lock();
   for (;;) {
-    waitForWork(lock);
+    waitForWork();
     const std::vector<Command> commands = std::exchange(commands_, {});
     if (ended_) break;
-    lock.unlock();
+    mutex_.unlock();
     for (const Command& command : commands) {
       carryOut(command);
     }
     for (const auto& recording : open_) {
       recording->drain();
     }
-    lock.lock();
+    mutex_.lock();
   }
-  lock.unlock();
+  mutex_.unlock();
   for (const auto& recording : std::exchange(open_, {})) {
     recording->release();
     recording->discard();
   }
 }
 
-void TraceThread::waitForWork(std::unique_lock<std::mutex>& lock) {
-  const auto hasWork = [this] { return ended_ || mustDrain_ || !commands_.empty(); };
+void TraceThread::waitForWork() {
+  const auto hasWork = [this]() TARN_REQUIRES(mutex_) { return ended_ || mustDrain_ || !commands_.empty(); };
   if (open_.empty()) {
-    changed_.wait(lock, hasWork);
+    changed_.wait(mutex_, hasWork);
   } else {
-    changed_.wait_for(lock, limits_.drainInterval, hasWork);
+    changed_.waitFor(mutex_, limits_.drainInterval, hasWork);
   }
   mustDrain_ = false;
 }
@@ -88,9 +88,9 @@ void TraceThread::carryOut(const Command& command) {
 }
 
 void TraceThread::wake() {
-  const std::lock_guard lock(mutex_);
+  const platform::MutexLock lock(mutex_);
   mustDrain_ = true;
-  changed_.notify_one();
+  changed_.notifyOne();
 }
 
 }  // namespace tarn::linux_host

@@ -5,14 +5,13 @@
 #pragma once
 
 #include <chrono>
-#include <condition_variable>
 #include <cstddef>
 #include <memory>
-#include <mutex>
 #include <thread>
 #include <vector>
 
 #include "host/traces/TraceRecording.h"
+#include "platform/ThreadSafety.h"
 
 namespace tarn::linux_host {
 
@@ -39,20 +38,19 @@ class TraceThread {
   };
 
   void work();
-  void waitForWork(std::unique_lock<std::mutex>& lock);
+  void waitForWork() TARN_REQUIRES(mutex_);
   void carryOut(const Command& command);
   void wake();
 
   const PerformanceTraceLimits limits_;
   std::vector<std::shared_ptr<TraceRecording>> open_;  // the thread's own
 
-  std::mutex mutex_;
-  std::condition_variable changed_;
-  // Guarded by mutex_.
-  std::thread thread_;
-  std::vector<Command> commands_;
-  bool mustDrain_ = false;
-  bool ended_ = false;
+  platform::Mutex mutex_;
+  platform::ConditionVariable changed_;
+  std::thread thread_ TARN_GUARDED_BY(mutex_);
+  std::vector<Command> commands_ TARN_GUARDED_BY(mutex_);
+  bool mustDrain_ TARN_GUARDED_BY(mutex_) = false;
+  bool ended_ TARN_GUARDED_BY(mutex_) = false;
 };
 
 }  // namespace tarn::linux_host

@@ -17,6 +17,8 @@
 #include <mutex>
 #include <vector>
 
+#include "platform/ThreadSafety.h"
+
 namespace tarn {
 
 namespace platform {
@@ -62,8 +64,8 @@ class ProcessState {
   std::shared_ptr<void> find(const void* tag, std::shared_ptr<void> (*make)());
   std::shared_ptr<void> takeLast();
 
-  std::mutex mutex_;
-  std::vector<Entry> entries_;  // in the order in which they were made; guarded by mutex_
+  platform::Mutex mutex_;
+  std::vector<Entry> entries_ TARN_GUARDED_BY(mutex_);  // in the order in which they were made
 };
 
 }  // namespace tarn

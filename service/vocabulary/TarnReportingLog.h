@@ -1,8 +1,8 @@
-// The one logging helper. Every log line of the system goes through TarnReportingLog, which puts the prefix
-// "%25s:%-5d " (module, line) before the text.
+// The one logging helper. Every log line of the system has the prefix "%25s:%-5d " (module, line) before its text; a
+// module names itself and its category once, in a logger:
 //
-//   TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Info, kModule, "created reporting session for ID: %lli",
-//   id);
+//   constexpr TarnReportingLogger kLog{TarnReportingSessionCategory, "TarnReportingSession"};
+//   kLog(LogLevel::Info, "created reporting session for ID: %lli", id);
 //
 // A conversion in the text (%@, %s, %i, %d, %u, %ld, %lu, %lli, %lld, %llu, %f, %x) takes the next argument and prints
 // it by the argument's own type, so a wrong letter can't read wrong memory: integers in decimal (%x: hexadecimal), a
@@ -77,12 +77,24 @@ void TarnReportingLog(const platform::LogCategory& category, LogLevel level, std
   }
 }
 
-// The same without the module prefix, for the few lines that carry none.
-template <class... Arguments>
-void TarnReportingLogPlain(const platform::LogCategory& category, LogLevel level, const LogText& text,
-                           const Arguments&... arguments) {
-  TarnReportingLog(category, level, {}, text, arguments...);
-}
+// The log of one module. A module without a name is for the few lines that carry no prefix.
+class TarnReportingLogger {
+ public:
+  using Category = const platform::LogCategory& (*)();
+
+  constexpr TarnReportingLogger(Category category, std::string_view module) : category_(category), module_(module) {}
+
+  template <class... Arguments>
+  void operator()(LogLevel level, const LogText& text, const Arguments&... arguments) const {
+    if (detail::logEnabled(level)) [[unlikely]] {
+      TarnReportingLog(category_(), level, module_, text, arguments...);
+    }
+  }
+
+ private:
+  Category category_;
+  std::string_view module_;
+};
 
 // The log categories, all under the subsystem "sys.oxbow.tarnkit".
 const platform::LogCategory& TarnReportingClientCategory();

@@ -123,6 +123,18 @@ bool TarnReportingUtilityWait(platform::Condition& condition, double timeoutSeco
   return true;
 }
 
+bool TarnReportingUtilityWait(platform::Condition& condition, std::chrono::nanoseconds timeout, const bool& flag) {
+  const platform::Clock& clock = TarnReportingFacilities().clock;
+  const auto deadline = clock.monotonic() + timeout;
+  const std::lock_guard lock(condition);
+  for (auto left = timeout; !flag && left > std::chrono::nanoseconds::zero(); left = deadline - clock.monotonic()) {
+    if (!condition.waitFor(left)) {
+      break;
+    }
+  }
+  return flag;
+}
+
 void TarnReportingUtilitySignal(platform::Condition& condition, bool& flag) {
   const std::lock_guard lock(condition);
   flag = true;

@@ -2,6 +2,7 @@
 #pragma once
 
 #include <atomic>
+#include <chrono>
 #include <cstdint>
 #include <memory>
 #include <optional>
@@ -25,6 +26,9 @@ struct LogCategory;
 bool TarnReportingUtilityWait(platform::Condition& condition, double timeoutSeconds, const bool& flag,
                               std::string_view waitingText, std::string_view timeoutText,
                               const platform::LogCategory& logCategory);
+// The same for a worker that tells in words of its own what it gave up: logs nothing, and a wake-up that finds the flag
+// unset doesn't prolong the wait.
+bool TarnReportingUtilityWait(platform::Condition& condition, std::chrono::nanoseconds timeout, const bool& flag);
 // Sets the flag and wakes one waiter. Threads: any. A pair of condition and flag serves one hand-over.
 void TarnReportingUtilitySignal(platform::Condition& condition, bool& flag);
 

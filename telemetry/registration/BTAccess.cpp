@@ -8,9 +8,11 @@ namespace tarn {
 
 namespace {
 
+constexpr TarnReportingLogger kLog{TarnReportingAudioRegistrationCategory, "BTAccess"};
+
 // Comes before the base unit's own line.
 std::shared_ptr<plist::Dictionary> beginInfo() {
-  TarnReportingLog(TarnReportingAudioRegistrationCategory(), LogLevel::Debug, "BTAccess", "BTAccess initialize");
+  kLog(LogLevel::Debug, "BTAccess initialize");
   return std::make_shared<plist::Dictionary>();
 }
 

@@ -9,7 +9,7 @@ namespace tarn {
 
 namespace {
 
-constexpr std::string_view kModule = "BaseUnit";
+constexpr TarnReportingLogger kLog{TarnReportingAudioRegistrationCategory, "BaseUnit"};
 
 const plist::Key& nameOf(platform::AccessoryPart part) {
   static const plist::Key kLeft("Left");
@@ -29,11 +29,11 @@ const plist::Key& nameOf(platform::AccessoryPart part) {
 }  // namespace
 
 BaseUnit::BaseUnit(platform::AccessoryQueries* queries) : queries_(queries) {
-  TarnReportingLog(TarnReportingAudioRegistrationCategory(), LogLevel::Debug, kModule, "BaseUnit initialize");
+  kLog(LogLevel::Debug, "BaseUnit initialize");
 }
 
 platform::MaybeError BaseUnit::enumerateBluetoothDevices() {
-  TarnReportingLog(TarnReportingAudioRegistrationCategory(), LogLevel::Default, kModule, "Enumerate Bluetooth!");
+  kLog(LogLevel::Default, "Enumerate Bluetooth!");
   records_.clear();
   if (queries_ == nullptr) {
     return {};

@@ -19,7 +19,7 @@ namespace tarn {
 
 namespace {
 
-constexpr std::string_view kModule = "TarnReportingRegistrationPublication";
+constexpr TarnReportingLogger kLog{TarnReportingAudioRegistrationCategory, "TarnReportingRegistrationPublication"};
 constexpr int kClientType = 52;
 constexpr float kClientVersion = 2.1F;
 constexpr double kWeekSeconds = 604800;
@@ -67,8 +67,7 @@ void TarnReportingRegistrationPublication::begin(const TarnReportingSession& ses
         if (backends) {
           self->sendRecords();
         } else {
-          TarnReportingLog(TarnReportingAudioRegistrationCategory(), LogLevel::Error, kModule,
-                           "no backends found, this session won't get sent to the server");
+          kLog(LogLevel::Error, "no backends found, this session won't get sent to the server");
         }
       });
 }
@@ -77,7 +76,7 @@ void TarnReportingRegistrationPublication::sendRecords() {
   for (const plist::Dictionary& record : records_) {
     _sendMessage(TarnReportingSessionMessage(record, AudioEventCategory::Tessels, AudioEventType::Summary));
   }
-  TarnReportingLog(TarnReportingAudioRegistrationCategory(), LogLevel::Debug, kModule, "Message Sent->");
+  kLog(LogLevel::Debug, "Message Sent->");
 }
 
 // NOLINTNEXTLINE(readability-identifier-naming): its given name
@@ -90,15 +89,13 @@ void TarnReportingRegistrationPublication::_sendMessage(const TarnReportingSessi
                                         static_cast<std::uint16_t>(message.type()), message.message());
   if (!result.sent) {
     if (result.error) {
-      TarnReportingLog(TarnReportingAudioRegistrationCategory(), LogLevel::Error, kModule, "error sending message %@",
-                       result.error->text);
+      kLog(LogLevel::Error, "error sending message %@", result.error->text);
     }
     return;
   }
-  TarnReportingLog(TarnReportingAudioRegistrationCategory(), LogLevel::Default, kModule,
-                   "RTCReportingAgent %@ : message %@ : category %i : type %i", rtcReportingSession_->description(),
-                   message.message(), static_cast<std::uint32_t>(message.category()),
-                   static_cast<std::uint16_t>(message.type()));
+  kLog(LogLevel::Default, "RTCReportingAgent %@ : message %@ : category %i : type %i",
+       rtcReportingSession_->description(), message.message(), static_cast<std::uint32_t>(message.category()),
+       static_cast<std::uint16_t>(message.type()));
   state_->scheduleNextInvocation(TarnReportingFacilities().clock.epochSeconds() + kWeekSeconds);
 }
 

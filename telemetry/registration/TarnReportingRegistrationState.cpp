@@ -12,6 +12,7 @@ namespace tarn {
 
 namespace {
 
+constexpr TarnReportingLogger kLog{TarnReportingAudioRegistrationCategory, "TarnReportingRegistrationState"};
 constexpr std::string_view kSuite = "sys.oxbow.tarnkit";
 constexpr std::string_view kNextInvocation = "AudioRegistrationNextInvocationEpoch";
 constexpr std::string_view kEnumerationCheck = "AudioRegistrationTSEnumerationCheckEpoch";
@@ -24,8 +25,7 @@ double load(std::string_view key) {
 // What can't be stored is good for this process still.
 void store(std::string_view key, const plist::ValueView& value) {
   if (!TarnReportingFacilities().defaults.setValue(kSuite, key, value)) {
-    TarnReportingLog(TarnReportingAudioRegistrationCategory(), LogLevel::Error, "TarnReportingRegistrationState",
-                     "failed to store %@", key);
+    kLog(LogLevel::Error, "failed to store %@", key);
   }
 }
 

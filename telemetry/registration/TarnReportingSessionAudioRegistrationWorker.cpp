@@ -21,17 +21,13 @@ namespace tarn {
 
 namespace {
 
-constexpr std::string_view kModule = TarnReportingSessionAudioRegistrationWorker::kClassName;
+constexpr TarnReportingLogger kLog{TarnReportingAudioRegistrationCategory,
+                                   TarnReportingSessionAudioRegistrationWorker::kClassName};
 constexpr std::string_view kDeviceSignature = "kbdQ ( 0f3e ) ( 7305 )";
 constexpr double kMinuteSeconds = 60;
 constexpr double kDaySeconds = 86400;
 constexpr std::uint32_t kWeekSeconds = 604800;
 constexpr double kLookBackSeconds = 691200;  // eight days
-
-template <class... Arguments>
-void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
-  TarnReportingLog(TarnReportingAudioRegistrationCategory(), level, kModule, text, arguments...);
-}
 
 double currentEpoch() {
   return TarnReportingFacilities().clock.epochSeconds();
@@ -45,7 +41,7 @@ std::uint32_t wholeEpoch(const plist::ValueView& epoch) {
 
 std::unique_ptr<TarnReportingSessionAudioRegistrationWorker>
 TarnReportingSessionAudioRegistrationWorker::initWithSession(const std::shared_ptr<TarnReportingSession>&) {
-  log(LogLevel::Debug, "TarnReportingSessionAudioRegistrationWorker unsupported");
+  kLog(LogLevel::Debug, "TarnReportingSessionAudioRegistrationWorker unsupported");
   return nullptr;
 }
 
@@ -56,7 +52,7 @@ TarnReportingSessionAudioRegistrationWorker::TarnReportingSessionAudioRegistrati
 TarnReportingSessionAudioRegistrationWorker::~TarnReportingSessionAudioRegistrationWorker() = default;
 
 bool TarnReportingSessionAudioRegistrationWorker::start() {
-  log(LogLevel::Debug, "Starting TarnReportingSessionAudioRegistrationWorker");
+  kLog(LogLevel::Debug, "Starting TarnReportingSessionAudioRegistrationWorker");
   setStarted(true);
   return true;
 }
@@ -73,7 +69,7 @@ void TarnReportingSessionAudioRegistrationWorker::handleMessage(
     state_->setEnumerationCheckEpoch(now);
   }
   const double wait = state_->enumerationCheckEpoch() - now;
-  log(LogLevel::Debug, "Time to next BT Enumeration: %f seconds / %f days", wait, wait / kDaySeconds);
+  kLog(LogLevel::Debug, "Time to next BT Enumeration: %f seconds / %f days", wait, wait / kDaySeconds);
   if (wait <= 0) {
     enumerate();
   }
@@ -81,7 +77,7 @@ void TarnReportingSessionAudioRegistrationWorker::handleMessage(
 
 void TarnReportingSessionAudioRegistrationWorker::enumerate() {
   if (const platform::MaybeError error = state_->enumerate()) {
-    log(LogLevel::Debug, "Exception in BT gatherData : %@", error->text);
+    kLog(LogLevel::Debug, "Exception in BT gatherData : %@", error->text);
     state_->scheduleEnumerationCheck(currentEpoch() + kDaySeconds);
     return;
   }
@@ -90,9 +86,9 @@ void TarnReportingSessionAudioRegistrationWorker::enumerate() {
 }
 
 void TarnReportingSessionAudioRegistrationWorker::stop() {
-  log(LogLevel::Debug, "Stopping TarnReportingSessionAudioRegistrationWorker");
+  kLog(LogLevel::Debug, "Stopping TarnReportingSessionAudioRegistrationWorker");
   if (!state_->registrationInfo() || !state_->registrationInfo()->contains(registration::kSplunk)) {
-    log(LogLevel::Debug, "There have been no BT enumerations. Skip further processing");
+    kLog(LogLevel::Debug, "There have been no BT enumerations. Skip further processing");
     return;
   }
   const double next = state_->nextInvocationEpoch();
@@ -100,27 +96,27 @@ void TarnReportingSessionAudioRegistrationWorker::stop() {
   if (next == 0) {
     const double first = now + static_cast<double>(TarnReportingFacilities().randomSource.below(kWeekSeconds));
     state_->scheduleNextInvocation(first);
-    log(LogLevel::Debug, "Current Epoch: %f; nextInvocationEpoch is %f", now, first);
+    kLog(LogLevel::Debug, "Current Epoch: %f; nextInvocationEpoch is %f", now, first);
     return;
   }
-  log(LogLevel::Default, "Time to next Invocation: %f seconds / %f days", next - now, (next - now) / kDaySeconds);
+  kLog(LogLevel::Default, "Time to next Invocation: %f seconds / %f days", next - now, (next - now) / kDaySeconds);
   if (now > next) {
     publish(now);
   }
 }
 
 void TarnReportingSessionAudioRegistrationWorker::publish(double now) {
-  log(LogLevel::Debug, "We could publish");
+  kLog(LogLevel::Debug, "We could publish");
   state_->scheduleNextInvocation(now + kDaySeconds);
   std::vector<plist::Dictionary> records = recentRecords(now);
   if (records.empty()) {
-    log(LogLevel::Debug,
-        "No active Bud connections detected since last publish. Skip publishing anything; check again after "
-        "SamplingPeriod");
+    kLog(LogLevel::Debug,
+         "No active Bud connections detected since last publish. Skip publishing anything; check again after "
+         "SamplingPeriod");
     state_->scheduleNextInvocation(now + kWeekSeconds);
     return;
   }
-  log(LogLevel::Debug, "At least one active Bud connection detected since last publish. Let's publish to RTC!");
+  kLog(LogLevel::Debug, "At least one active Bud connection detected since last publish. Let's publish to RTC!");
   setupRTCReporterInterface(std::move(records));
 }
 
@@ -152,12 +148,12 @@ void TarnReportingSessionAudioRegistrationWorker::setupRTCReporterInterface(std:
   if (!owner) {
     return;
   }
-  log(LogLevel::Debug, "entering rtcreporting %s", kOperation);
+  kLog(LogLevel::Debug, "entering rtcreporting %s", kOperation);
   platform::RtcReportingService* const service = TarnReportingFacilities().rtcReporting;
   const std::optional<std::string> token = service == nullptr ? std::nullopt : service->newHierarchyToken(std::nullopt);
   if (!token) {
-    log(LogLevel::Error, "newHierarchyTokenFromParentToken returned nil. Will skip rtc for this session. %s",
-        kOperation);
+    kLog(LogLevel::Error, "newHierarchyTokenFromParentToken returned nil. Will skip rtc for this session. %s",
+         kOperation);
     return;
   }
   publication_ = std::make_shared<TarnReportingRegistrationPublication>(state_, std::move(records));

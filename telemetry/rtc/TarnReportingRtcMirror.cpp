@@ -16,7 +16,7 @@ namespace {
 using SessionInfo = platform::RtcSessionInfoKeys;
 using UserInfo = platform::RtcUserInfoKeys;
 
-constexpr std::string_view kModule = "TarnReportingSessionRtcWorker";
+constexpr TarnReportingLogger kLog{TarnReportingSessionRTCReportingCategory, "TarnReportingSessionRtcWorker"};
 constexpr std::string_view kQueueName = "sys.oxbow.tarnkit.session.rtcreporting";
 constexpr std::chrono::seconds kBackendWait{9};
 
@@ -25,11 +25,6 @@ constexpr float kVersionNumber = 2.1F;
 constexpr std::string_view kClientNameTarnkit = "sys.oxbow.tarnkit";
 constexpr std::string_view kSessionID = "TarnReportingSessionID";
 constexpr std::string_view kHostApplication = "HostApplicationDisplayID";
-
-template <class... Arguments>
-void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
-  TarnReportingLog(TarnReportingSessionRTCReportingCategory(), level, kModule, text, arguments...);
-}
 
 plist::Dictionary sessionInfoOf(const TarnReportingRtcMirror::Started& session, const std::string& token) {
   const bool batch = TarnReportingRtcMirror::shouldBatchRTCReportingEventsForServiceType(session.serviceType);
@@ -85,7 +80,7 @@ void TarnReportingRtcMirror::start(const Started& session) {
   const bool asked = open(session);
   starting_ = false;
   if (asked) {
-    log(LogLevel::Default, "waiting to find backends");
+    kLog(LogLevel::Default, "waiting to find backends");
     rtcreportingBackendSemaphore_.wait(rtcReportingQueue_, kBackendWait,
                                        [self = shared_from_this()](bool signalled) { self->endWait(signalled); });
   }
@@ -94,11 +89,11 @@ void TarnReportingRtcMirror::start(const Started& session) {
 // Asks for backends; false without a token.
 bool TarnReportingRtcMirror::open(const Started& session) {
   constexpr std::string_view kOperation = "start";
-  log(LogLevel::Debug, "entering rtcreporting %s", kOperation);
+  kLog(LogLevel::Debug, "entering rtcreporting %s", kOperation);
   rtcReportingAgentToken_ = service_.newHierarchyToken(std::nullopt);
   if (!rtcReportingAgentToken_) {
-    log(LogLevel::Error, "newHierarchyTokenFromParentToken returned nil. Will skip rtc for this session. %s",
-        kOperation);
+    kLog(LogLevel::Error, "newHierarchyTokenFromParentToken returned nil. Will skip rtc for this session. %s",
+         kOperation);
     return false;
   }
   rtcReportingSession_ =
@@ -112,11 +107,11 @@ bool TarnReportingRtcMirror::open(const Started& session) {
 
 void TarnReportingRtcMirror::foundBackends(const Backends& backends) {
   if (backends) {
-    log(LogLevel::Default, "list of backends %@", [&] { return arrayOf(*backends); });
+    kLog(LogLevel::Default, "list of backends %@", [&] { return arrayOf(*backends); });
     rtcReportingSessionStarted_ = true;
     started_ = true;
   } else {
-    log(LogLevel::Error, "no backends found, this session won't get sent to the server");
+    kLog(LogLevel::Error, "no backends found, this session won't get sent to the server");
     rtcReportingSessionStarted_ = false;
   }
   rtcreportingBackendSemaphore_.signal();
@@ -124,19 +119,19 @@ void TarnReportingRtcMirror::foundBackends(const Backends& backends) {
 
 void TarnReportingRtcMirror::endWait(bool signalled) {
   if (!signalled) {
-    log(LogLevel::Default, "timed out waiting for backends");
+    kLog(LogLevel::Default, "timed out waiting for backends");
     release();
   } else if (rtcReportingSessionStarted_) {
-    log(LogLevel::Default, "continuing with backends!");
+    kLog(LogLevel::Default, "continuing with backends!");
   } else {
-    log(LogLevel::Default, "failed to find backend");
+    kLog(LogLevel::Default, "failed to find backend");
     release();
   }
 }
 
 void TarnReportingRtcMirror::handleMessage(const MessagePointer& message) {
   if (!rtcReportingSessionStarted_) {
-    log(LogLevel::Default, "Session never started. %s", "handleMessage");
+    kLog(LogLevel::Default, "Session never started. %s", "handleMessage");
     return;
   }
   _sendMessage(message);
@@ -145,31 +140,31 @@ void TarnReportingRtcMirror::handleMessage(const MessagePointer& message) {
 void TarnReportingRtcMirror::stop(const Stopped& session) {
   constexpr std::string_view kOperation = "stop";
   if (!rtcReportingSessionStarted_) {
-    log(LogLevel::Default, "Session never started. %s", kOperation);
+    kLog(LogLevel::Default, "Session never started. %s", kOperation);
     return;
   }
   if (session.hadMessages) {
     sendSummary(session);
   }
-  log(LogLevel::Debug, "entering rtcreporting %s", kOperation);
+  kLog(LogLevel::Debug, "entering rtcreporting %s", kOperation);
   if (rtcReportingSession_) {
     rtcReportingSession_->flushMessages();
   }
   release();
   rtcReportingSessionStarted_ = false;
-  log(LogLevel::Debug, "stopping and setting session to nil");
+  kLog(LogLevel::Debug, "stopping and setting session to nil");
 }
 
 void TarnReportingRtcMirror::sendSummary(const Stopped& session) {
   TarnReportingRtcSummary summary = TarnReportingMakeRtcSummary(session.serviceType, session.messages, longestSummary_);
   if (!summary.complete) {
-    log(LogLevel::Error, "rtc summary event is cut, the session has too many messages. reporterID=%lli",
-        session.reporterID);
+    kLog(LogLevel::Error, "rtc summary event is cut, the session has too many messages. reporterID=%lli",
+         session.reporterID);
   }
-  log(LogLevel::Default, "sending rtc summary event. reporterID=%lli", session.reporterID);
+  kLog(LogLevel::Default, "sending rtc summary event. reporterID=%lli", session.reporterID);
   for (const plist::Dictionary::Entry& entry : summary.payload) {
-    log(LogLevel::Debug, "sending rtc summary event. reporterID=%lli %@=\"%@\"", session.reporterID, entry.key.text(),
-        entry.value);
+    kLog(LogLevel::Debug, "sending rtc summary event. reporterID=%lli %@=\"%@\"", session.reporterID, entry.key.text(),
+         entry.value);
   }
   _sendMessage(std::make_shared<TarnReportingSessionMessage>(std::move(summary.payload), AudioEventCategory::Unknown,
                                                              AudioEventType::Unknown));
@@ -182,7 +177,7 @@ void TarnReportingRtcMirror::release() {
 
 // NOLINTNEXTLINE(readability-identifier-naming): its given name
 void TarnReportingRtcMirror::_sendMessage(const MessagePointer& message) {
-  log(LogLevel::Debug, "entering rtcreporting %s", "_sendMessage");
+  kLog(LogLevel::Debug, "entering rtcreporting %s", "_sendMessage");
   const std::uint16_t category = retrieveRTCReportingCategoryFromCategory(message->category());
   const auto type = static_cast<std::uint16_t>(message->type());
   if (!TarnReportingUtilityIsInternalBuild()) {
@@ -193,12 +188,12 @@ void TarnReportingRtcMirror::_sendMessage(const MessagePointer& message) {
   }
   const auto result = rtcReportingSession_->sendMessage(category, type, message->message());
   if (result.sent) {
-    log(
+    kLog(
         LogLevel::Debug, "RTCReportingAgent %@ : message %@ : category %i : type %i",
         [&] { return rtcReportingSession_->description(); }, message->message(),
         static_cast<std::int32_t>(message->category()), type);
   } else if (result.error) {
-    log(LogLevel::Error, "error sending message %@", result.error->text);
+    kLog(LogLevel::Error, "error sending message %@", result.error->text);
   }
 }
 

@@ -10,12 +10,8 @@ namespace tarn {
 
 namespace {
 
-constexpr std::string_view kModule = "TarnReportingSessionTraceWorker";  // for which this is read
-
-template <class... Arguments>
-void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
-  TarnReportingLog(TarnReportingTraceCategory(), level, kModule, text, arguments...);
-}
+constexpr TarnReportingLogger kLog{TarnReportingTraceCategory,
+                                   "TarnReportingSessionTraceWorker"};  // for which this is read
 
 // What property-list files call such a value.
 std::string_view className(plist::Kind kind) {
@@ -49,12 +45,12 @@ std::string_view className(plist::Kind kind) {
 std::optional<std::vector<plist::Dictionary>> readProbeDescriptions(std::string_view path) {
   const auto file = TarnReportingFacilities().fileSystem.readFile(path, plist::kMaximumPropertyListBytes);
   if (file.failed()) {
-    log(LogLevel::Error, "%@ failed to get SkeinProbes from %@", file.error->text, path);
+    kLog(LogLevel::Error, "%@ failed to get SkeinProbes from %@", file.error->text, path);
     return std::nullopt;
   }
   const plist::PropertyListReading reading = plist::readPropertyList(file.value);
   if (reading.fault) {
-    log(LogLevel::Error, "%@ failed to get SkeinProbes from %@", reading.fault->description(), path);
+    kLog(LogLevel::Error, "%@ failed to get SkeinProbes from %@", reading.fault->description(), path);
     return std::nullopt;
   }
   const plist::ValueView root = reading.value;
@@ -62,7 +58,7 @@ std::optional<std::vector<plist::Dictionary>> readProbeDescriptions(std::string_
     return std::vector<plist::Dictionary>{root.dictionary()};
   }
   if (root.kind() != plist::Kind::Array) {
-    log(LogLevel::Error, "unsupported root class %@", className(root.kind()));
+    kLog(LogLevel::Error, "unsupported root class %@", className(root.kind()));
     return std::nullopt;
   }
   std::vector<plist::Dictionary> descriptions;
@@ -70,7 +66,7 @@ std::optional<std::vector<plist::Dictionary>> readProbeDescriptions(std::string_
     if (item.kind() == plist::Kind::Dictionary) {
       descriptions.push_back(item.dictionary());
     } else {
-      log(LogLevel::Error, "unsupported class %@ of a probe in %@", className(item.kind()), path);
+      kLog(LogLevel::Error, "unsupported class %@ of a probe in %@", className(item.kind()), path);
     }
   }
   return root.array().empty() ? std::nullopt : std::optional(std::move(descriptions));

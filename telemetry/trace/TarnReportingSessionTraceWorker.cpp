@@ -19,15 +19,10 @@ namespace tarn {
 
 namespace {
 
-constexpr std::string_view kModule = "TarnReportingSessionTraceWorker";
+constexpr TarnReportingLogger kLog{TarnReportingTraceCategory, "TarnReportingSessionTraceWorker"};
 constexpr std::string_view kDefaultPerfDataName = "TarnReporting";
 constexpr std::int32_t kDefaultTemplate = 2;
 constexpr std::int32_t kProfileTemplate = 3;
-
-template <class... Arguments>
-void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
-  TarnReportingLog(TarnReportingTraceCategory(), level, kModule, text, arguments...);
-}
 
 bool isTraced(const TarnReportingSession& session) {
   return session.serviceType() == AudioServiceType::Test && TarnReportingUtilityIsInternalBuild();
@@ -42,8 +37,8 @@ std::shared_ptr<TarnReportingTraceRecording> makeRecording(const plist::Dictiona
   traceConfig.compressWhenFinished = false;
   auto traceSession = facilities.performanceTrace->createSession(traceConfig);
   if (!traceSession) {
-    log(LogLevel::Error, "Could not start PerformanceTrace. There is no trace of template %d",
-        traceConfig.templateNumber);
+    kLog(LogLevel::Error, "Could not start PerformanceTrace. There is no trace of template %d",
+         traceConfig.templateNumber);
     return nullptr;
   }
   return std::make_shared<TarnReportingTraceRecording>(std::move(traceSession), facilities.conditions.makeCondition());
@@ -77,8 +72,8 @@ bool TarnReportingSessionTraceWorker::start() {
   const plist::Dictionary configuration = owner->configuration();
   const std::string_view descriptions = configuredText(configuration, kProbeDescriptionsKey);
   if (!TarnReportingFacilities().fileSystem.exists(descriptions)) {
-    log(LogLevel::Error, "Could not start PerformanceTrace. TarnReportingSkeinPlistFilePath: %@ is not a valid path",
-        configuration.get(kProbeDescriptionsKey));
+    kLog(LogLevel::Error, "Could not start PerformanceTrace. TarnReportingSkeinPlistFilePath: %@ is not a valid path",
+         configuration.get(kProbeDescriptionsKey));
     return started();
   }
   recording_ = makeRecording(configuration);

@@ -4,23 +4,17 @@
 #include <string_view>
 #include <utility>
 
-#include "platform/Clock.h"
-#include "platform/Facilities.h"
 #include "service/vocabulary/TarnReportingLog.h"
-#include "service/vocabulary/TarnReportingPlatform.h"
+#include "service/vocabulary/TarnReportingUtility.h"
 
 namespace tarn {
 
 namespace {
 
-constexpr std::string_view kModule = "TarnReportingSessionTraceWorker";  // whose delegate this is
+constexpr TarnReportingLogger kLog{TarnReportingTraceCategory,
+                                   "TarnReportingSessionTraceWorker"};  // whose delegate this is
 constexpr std::chrono::seconds kStartWait{15};
 constexpr std::chrono::seconds kStopWait{180};
-
-template <class... Arguments>
-void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
-  TarnReportingLog(TarnReportingTraceCategory(), level, kModule, text, arguments...);
-}
 
 }  // namespace
 
@@ -34,10 +28,10 @@ bool TarnReportingTraceRecording::start() {
   const auto starting = traceSession();
   starting->setDelegate(weak_from_this());
   starting->startTrace();
-  if (waitForSignal(kStartWait)) {
+  if (TarnReportingUtilityWait(*condition_, kStartWait, answered_)) {
     return true;
   }
-  log(LogLevel::Error, "timed out waiting for performance trace to start");
+  kLog(LogLevel::Error, "timed out waiting for performance trace to start");
   if (const auto late = traceSession(); late && late->isValid()) {
     late->stopTrace();
   }
@@ -50,8 +44,8 @@ TarnReportingTraceRecording::End TarnReportingTraceRecording::stop() {
     return End::NoTrace;
   }
   stopping->stopTrace();
-  if (!waitForSignal(kStopWait)) {
-    log(LogLevel::Error, "timed out waiting for performance trace to stop.  No pdj file wil be generated. ");
+  if (!TarnReportingUtilityWait(*condition_, kStopWait, completed_)) {
+    kLog(LogLevel::Error, "timed out waiting for performance trace to stop.  No pdj file wil be generated. ");
     return End::TimedOut;
   }
   return End::Completed;
@@ -73,11 +67,11 @@ void TarnReportingTraceRecording::performanceTraceDidStart(const platform::Maybe
   }
   if (error) {
     clearTraceSession();
-    log(LogLevel::Error, "performanceTraceDidStart %@", error->text);
+    kLog(LogLevel::Error, "performanceTraceDidStart %@", error->text);
   } else {
-    log(LogLevel::Info, "Performance Trace Started");
+    kLog(LogLevel::Info, "Performance Trace Started");
   }
-  signal();
+  TarnReportingUtilitySignal(*condition_, answered_);
 }
 
 void TarnReportingTraceRecording::performanceTraceDidStop(const platform::MaybeError& error) {
@@ -86,9 +80,9 @@ void TarnReportingTraceRecording::performanceTraceDidStop(const platform::MaybeE
   }
   if (error) {
     clearTraceSession();
-    log(LogLevel::Error, "performanceTraceDidStop %@", error->text);
+    kLog(LogLevel::Error, "performanceTraceDidStop %@", error->text);
   } else {
-    log(LogLevel::Info, "Performance Trace Stopped");
+    kLog(LogLevel::Info, "Performance Trace Stopped");
   }
 }
 
@@ -104,15 +98,17 @@ void TarnReportingTraceRecording::performanceTraceDidComplete(const std::string&
     eventsLeftOut_ = leftOut;
   }
   if (error) {
-    log(LogLevel::Error, "performanceTraceDidComplete %@", error->text);
+    kLog(LogLevel::Error, "performanceTraceDidComplete %@", error->text);
   } else {
     {
       const std::lock_guard lock(*condition_);
       finalTraceURL_ = location;
     }
-    log(LogLevel::Info, "Performance Trace Completed: %@", location);
+    kLog(LogLevel::Info, "Performance Trace Completed: %@", location);
   }
-  signal();
+  // Whichever of the two is waited for.
+  TarnReportingUtilitySignal(*condition_, answered_);
+  TarnReportingUtilitySignal(*condition_, completed_);
 }
 
 std::shared_ptr<platform::PerformanceTraceSession> TarnReportingTraceRecording::traceSession() const {
@@ -128,27 +124,6 @@ std::shared_ptr<platform::PerformanceTraceSession> TarnReportingTraceRecording::
 bool TarnReportingTraceRecording::isFirst(bool& told) {
   const std::lock_guard lock(*condition_);
   return !std::exchange(told, true);
-}
-
-void TarnReportingTraceRecording::signal() {
-  const std::lock_guard lock(*condition_);
-  ++signals_;
-  condition_->signal();
-}
-
-bool TarnReportingTraceRecording::waitForSignal(std::chrono::nanoseconds timeout) {
-  const platform::Clock& clock = TarnReportingFacilities().clock;
-  const auto deadline = clock.monotonic() + timeout;
-  const std::lock_guard lock(*condition_);
-  while (signals_ == 0) {
-    // A wake-up without a signal doesn't prolong the wait.
-    const auto left = deadline - clock.monotonic();
-    if (left.count() <= 0 || (!condition_->waitFor(left) && signals_ == 0)) {
-      return false;
-    }
-  }
-  --signals_;
-  return true;
 }
 
 }  // namespace tarn

@@ -8,8 +8,6 @@
 // which they block; the callbacks on any thread, also after the last wait or within start and stop.
 #pragma once
 
-#include <chrono>
-#include <cstddef>
 #include <cstdint>
 #include <memory>
 #include <optional>
@@ -53,12 +51,11 @@ class TarnReportingTraceRecording final : public platform::PerformanceTraceDeleg
   // Lets go of the session; the one that it was, so that it ends outside the lock.
   std::shared_ptr<platform::PerformanceTraceSession> clearTraceSession();
   bool isFirst(bool& told);
-  void signal();
-  bool waitForSignal(std::chrono::nanoseconds timeout);
 
   const std::shared_ptr<platform::Condition> condition_;
   // Guarded by condition_:
-  std::size_t signals_ = 0;  // that nobody waited for yet
+  bool answered_ = false;   // the start: the facility told something, be it the end
+  bool completed_ = false;  // the stop
   std::shared_ptr<platform::PerformanceTraceSession> traceSession_;
   std::optional<std::string> finalTraceURL_;
   std::uint64_t eventsLeftOut_ = 0;

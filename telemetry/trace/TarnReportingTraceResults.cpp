@@ -22,7 +22,8 @@ namespace tarn {
 
 namespace {
 
-constexpr std::string_view kModule = "TarnReportingSessionTraceWorker";  // whose results these are
+constexpr TarnReportingLogger kLog{TarnReportingTraceCategory,
+                                   "TarnReportingSessionTraceWorker"};  // whose results these are
 constexpr std::int32_t kResultsVersion = 4;
 constexpr std::uint32_t kWriterFlags = 0;
 constexpr std::uint32_t kDirectoryPermissions = 0777;  // less the process's mask
@@ -31,11 +32,6 @@ constexpr int kMissingClassStatus = 1;  // that of a service that can't serve; 2
 // The analysis library serves only those who know that its results are no promise.
 constexpr std::string_view kAcknowledgementVariable = "APPROVED_BY_SKEIN_TEAM";
 constexpr std::string_view kAcknowledgement = "tarnkit measures its own test sessions with it";
-
-template <class... Arguments>
-void log(LogLevel level, const LogText& text, const Arguments&... arguments) {
-  TarnReportingLog(TarnReportingTraceCategory(), level, kModule, text, arguments...);
-}
 
 bool isOurs(const platform::SignpostInterval& interval) {
   return interval.subsystem.find("sys.oxbow.audio") != std::string::npos ||
@@ -50,11 +46,11 @@ double millisecondsOf(const platform::SignpostInterval& interval) {
 std::shared_ptr<platform::TraceAnalysisLibrary> loadLibrary() {
   const platform::Facilities& facilities = TarnReportingFacilities();
   if (const auto error = facilities.processEnvironment.set(kAcknowledgementVariable, kAcknowledgement)) {
-    log(LogLevel::Error, "failed to set %@: %@", kAcknowledgementVariable, error->text);
+    kLog(LogLevel::Error, "failed to set %@: %@", kAcknowledgementVariable, error->text);
   }
   platform::TraceAnalysis::Loaded loaded = facilities.traceAnalysis->load();
   if (!loaded.library) {
-    log(LogLevel::Error, "Unable to find class %s", loaded.missingClass);
+    kLog(LogLevel::Error, "Unable to find class %s", loaded.missingClass);
     facilities.processControl.exitProcess(kMissingClassStatus);
   }
   return std::move(loaded.library);
@@ -89,9 +85,9 @@ TarnReportingTraceResults::TarnReportingTraceResults(const TarnReportingSession&
 
 void TarnReportingTraceResults::processTraceSkein(const std::optional<std::string>& tracePath) {
   const plist::ValueView path = tracePath ? plist::ValueView(*tracePath) : plist::ValueView();
-  log(LogLevel::Info, "Starting Skein Process Trace. Path: %@", path);
+  kLog(LogLevel::Info, "Starting Skein Process Trace. Path: %@", path);
   if (!tracePath || !TarnReportingFacilities().fileSystem.exists(*tracePath)) {
-    log(LogLevel::Error, "No traceResults at path: %@", path);
+    kLog(LogLevel::Error, "No traceResults at path: %@", path);
     return;
   }
   const std::optional<std::vector<plist::Dictionary>> descriptions =
@@ -105,7 +101,7 @@ void TarnReportingTraceResults::processTraceSkein(const std::optional<std::strin
   }
   const auto model = library->openTrace(*tracePath);
   if (model.failed()) {
-    log(LogLevel::Error, "failed to create Skein model: %@", model.error->text);
+    kLog(LogLevel::Error, "failed to create Skein model: %@", model.error->text);
     return;
   }
   // Without a writer there is nowhere to write to.
@@ -130,7 +126,7 @@ bool TarnReportingTraceResults::createPDWriter() {
     directory = files.wellKnownDirectory(platform::WellKnownDirectory::DiagnosticLogs) + "/Audio/Traces";
   }
   if (const auto error = files.createDirectories(directory, kDirectoryPermissions)) {
-    log(LogLevel::Error, "can't create logging directory at %@: %@", directory, error->text);
+    kLog(LogLevel::Error, "can't create logging directory at %@: %@", directory, error->text);
   }
   std::string outputFile(configuredText(configuration, kOutputFileNameKey));
   if (outputFile.empty()) {
@@ -138,10 +134,10 @@ bool TarnReportingTraceResults::createPDWriter() {
   }
   fullWriterPath_ = pathIn(directory, outputFile);
   tempWriterPath_ = pathIn(files.wellKnownDirectory(platform::WellKnownDirectory::Temporary), "temp_perfdata.pdj");
-  log(LogLevel::Info, "tempWriterPath: %@", tempWriterPath_);
+  kLog(LogLevel::Info, "tempWriterPath: %@", tempWriterPath_);
   auto opened = facilities.perfDataWriters->open(tempWriterPath_, mPerfDataName_, kResultsVersion, kWriterFlags);
   if (opened.failed()) {
-    log(LogLevel::Error, "Failed to open perfdata writer. errno: %d", opened.error->code);
+    kLog(LogLevel::Error, "Failed to open perfdata writer. errno: %d", opened.error->code);
     return false;
   }
   mWriter_ = std::move(opened.value);
@@ -156,7 +152,7 @@ void TarnReportingTraceResults::processSignposts(platform::TraceModel& trace) {
   };
   const auto intervals = trace.allSignpostIntervals();
   if (intervals.failed()) {
-    log(LogLevel::Error, "failed to create Skein signpost data model: %@", intervals.error->text);
+    kLog(LogLevel::Error, "failed to create Skein signpost data model: %@", intervals.error->text);
     return;
   }
   std::vector<Sums> sums;
@@ -166,7 +162,7 @@ void TarnReportingTraceResults::processSignposts(platform::TraceModel& trace) {
       continue;
     }
     const double milliseconds = millisecondsOf(interval);
-    log(LogLevel::Debug, "name:%@ time:%f ms", interval.name, milliseconds);
+    kLog(LogLevel::Debug, "name:%@ time:%f ms", interval.name, milliseconds);
     writeValue(interval.name, milliseconds);
     const auto [place, isNew] = places.try_emplace(interval.name, sums.size());
     if (isNew) {
@@ -182,7 +178,7 @@ void TarnReportingTraceResults::processSignposts(platform::TraceModel& trace) {
 }
 
 void TarnReportingTraceResults::processProbe(const platform::TraceProbe& probe) {
-  log(LogLevel::Debug, "%@, %@", probe.name, probe.kind);
+  kLog(LogLevel::Debug, "%@, %@", probe.name, probe.kind);
   for (const platform::TraceProbe& child : probe.children) {
     processProbe(child);
   }
@@ -202,7 +198,7 @@ void TarnReportingTraceResults::processProbe(const platform::TraceProbe& probe) 
     }
     currentProbe_ = probe.name;
     const double milliseconds = millisecondsOf(event);
-    log(LogLevel::Debug, "name:%@ time:%f ms", event.name, milliseconds);
+    kLog(LogLevel::Debug, "name:%@ time:%f ms", event.name, milliseconds);
     writeValue(probe.name, milliseconds);
     totalTimeValue_ += milliseconds;
     ++totalTimeMetrics_;
@@ -235,12 +231,12 @@ void TarnReportingTraceResults::writeExtensions() {
 
 void TarnReportingTraceResults::closeAndMove() {
   if (const auto error = mWriter_->close()) {
-    log(LogLevel::Error, "Failed to close perfdata writer. errno: %d", error->code);
+    kLog(LogLevel::Error, "Failed to close perfdata writer. errno: %d", error->code);
     return;
   }
-  log(LogLevel::Info, "Moving file from tempWriterPath: %@ to %@", tempWriterPath_, fullWriterPath_);
+  kLog(LogLevel::Info, "Moving file from tempWriterPath: %@ to %@", tempWriterPath_, fullWriterPath_);
   if (TarnReportingFacilities().fileSystem.moveFile(tempWriterPath_, fullWriterPath_)) {
-    log(LogLevel::Error, "Failed to move file");
+    kLog(LogLevel::Error, "Failed to move file");
   }
 }
 

@@ -7,6 +7,7 @@
 #include "derived/TarnReportingSystemMonitor.h"
 #include "service/vocabulary/TarnReportingUtility.h"
 #include "tests/session/SessionFixture.h"
+#include "tests/session/WorkersOf.h"
 
 namespace tarn {
 namespace {
@@ -237,8 +238,8 @@ TEST_F(SystemMonitorWorker, ObserversDoNotKeepTheDictionaryAlive) {
 TEST_F(SystemMonitorWorker, WithoutAMonitorItRunsAndSendsNothing) {
   const auto session = makeSession();
   session->start();
-  ASSERT_EQ(session->workers().producingMessageWorkers().size(), 1U);
-  EXPECT_TRUE(session->workers().producingMessageWorkers().front().worker->started());
+  ASSERT_EQ(producersOf(*session).size(), 1U);
+  EXPECT_TRUE(producersOf(*session).front()->worker->started());
   session->stop();
   EXPECT_TRUE(script().received.empty());
 }

@@ -152,6 +152,8 @@ class IncludeGraph(unittest.TestCase):
         text = "int a;\n#ifdef __linux__\n#endif\n"
         self.assertEqual(found(include_graph, {"session/Log.cpp": text}), [("session/Log.cpp", 2)])
         self.assertEqual(found(include_graph, {"host/log/Log.cpp": text}), [])
+        self.assertEqual(found(include_graph, {"platform/Log.h": ONCE + text}), [("platform/Log.h", 3)])
+        self.assertEqual(found(include_graph, {"platform/ThreadSafety.h": ONCE + text}), [])
 
     def test_a_header_without_pragma_once_is_reported(self):
         self.assertEqual(found(include_graph, {"plist/Value.h": "int a();\n"}), [("plist/Value.h", 1)])
@@ -171,6 +173,7 @@ class BannedCalls(unittest.TestCase):
         "auto* p = new Session();", "auto* p = ::new Session();",
         "return new Session();", "delete p;", "delete[] p;", "auto p = malloc(5);",
         "std::thread worker(run);", "auto f = std::async(run);", "exit(1);", "::_exit(1);", 'system("ls");',
+        "std::mutex lock_;",
         "GTEST_SKIP();", "TEST(A, DISABLED_b) {}", "friend class SessionTest;", "FRIEND_TEST(Session, stops);",
         "using namespace std;",
     )

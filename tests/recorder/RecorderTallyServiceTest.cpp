@@ -33,18 +33,6 @@ TEST_F(RecorderTallyServiceTest, NothingIsInUseWithoutPatterns) {
   EXPECT_FALSE(service.eventIsInUse("sys.oxbow.tarnkit.Playback.Start"));
 }
 
-TEST_F(RecorderTallyServiceTest, PayloadOfAnEventThatNobodyWantsIsNeverAskedFor) {
-  RecorderTallyService service = makeService({"wanted"});
-  int asked = 0;
-  service.sendEventLazy("unwanted", [&asked] {
-    ++asked;
-    return Dictionary{};
-  });
-  ASSERT_TRUE(flush());
-  EXPECT_EQ(asked, 0);
-  EXPECT_EQ(recorder_->counters().handedOver, 0U);
-}
-
 TEST_F(RecorderTallyServiceTest, PayloadIsAskedForOnceAtHandOver) {
   RecorderTallyService service = makeService({"*"});
   int asked = 0;

@@ -204,6 +204,14 @@ TEST_F(TarnReportingServiceTest, InvalidationReportsTheUptimeOfTheClient) {
   EXPECT_TRUE(service_->getAllClients().empty());
 }
 
+TEST_F(TarnReportingServiceTest, UptimeThatNobodyWantsIsNotHandedOver) {
+  const Client client = connect(41);
+  platform_.tally.useOnly({"other"});
+  client.connection->invalidate();
+  EXPECT_EQ(platform_.tally.askedNames(), std::vector<std::string>{kUptime});
+  EXPECT_TRUE(platform_.tally.sentNames().empty());
+}
+
 TEST_F(TarnReportingServiceTest, UptimeIsNeverNegative) {
   const Client client = connect(41);
   platform_.clock.setEpochSeconds(platform_.clock.epochSeconds() - 30);

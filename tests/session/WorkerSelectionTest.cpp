@@ -1,5 +1,6 @@
 // Which workers a session makes, and in which order they start, stop and get messages.
 #include "tests/session/SessionFixture.h"
+#include "tests/session/WorkersOf.h"
 
 namespace tarn {
 namespace {
@@ -10,12 +11,15 @@ class WorkerSelection : public SessionFixture {
  protected:
   using Strings = std::vector<std::string>;
 
-  static Strings namesOf(const std::vector<TarnReportingSessionWorkerSet::Member>& members) {
+  static Strings namesOf(const Members& members) {
     Strings names;
-    for (const auto& member : members) {
-      names.emplace_back(member.workerClass->name);
+    for (const auto* member : members) {
+      names.emplace_back(member->workerClass->name);
     }
     return names;
+  }
+  static Members all(const TarnReportingSession& session) {
+    return workersOf(session, [](const auto&) { return true; });
   }
   static Strings takeTrail() { return std::exchange(trail(), {}); }
 };
@@ -41,20 +45,19 @@ TEST_F(WorkerSelection, ClassWithoutInitWithSessionIsLeftOutAndLogged) {
   useWorkers<UnmakeableWorker, PlainWorker>();
   const auto session = makeSession();
   session->start();
-  EXPECT_EQ(namesOf(session->workers().messageWorkers()), (Strings{"PlainWorker"}));
+  EXPECT_EQ(namesOf(all(*session)), (Strings{"PlainWorker"}));
   EXPECT_EQ(platform_.log.count("Worker does not implement initWithSession! UnmakeableWorker"), 1U);
 }
 
 TEST_F(WorkerSelection, CreatedAndStartedSessionHoldsTheStartOnCreationWorkersFirst) {
   useWorkers<PlainWorker, ProducerWorker, BothWorker, EarlyWorker, ConsumerWorker>();
   const auto session = makeSession();
-  EXPECT_EQ(namesOf(session->workers().messageWorkers()), (Strings{"EarlyWorker"}));
+  EXPECT_EQ(namesOf(all(*session)), (Strings{"EarlyWorker"}));
   session->start();
-  EXPECT_EQ(namesOf(session->workers().messageWorkers()),
+  EXPECT_EQ(namesOf(all(*session)),
             (Strings{"EarlyWorker", "PlainWorker", "ProducerWorker", "BothWorker", "ConsumerWorker"}));
-  EXPECT_EQ(namesOf(session->workers().consumingMessageWorkers()),
-            (Strings{"EarlyWorker", "BothWorker", "ConsumerWorker"}));
-  EXPECT_EQ(namesOf(session->workers().producingMessageWorkers()), (Strings{"ProducerWorker", "BothWorker"}));
+  EXPECT_EQ(namesOf(consumersOf(*session)), (Strings{"EarlyWorker", "BothWorker", "ConsumerWorker"}));
+  EXPECT_EQ(namesOf(producersOf(*session)), (Strings{"ProducerWorker", "BothWorker"}));
   EXPECT_EQ(session->workerInstanceCount(), 5U);
 }
 
@@ -84,7 +87,7 @@ TEST_F(WorkerSelection, SingleMessageSessionHoldsOnlyWorkersThatAcceptIt) {
   useWorkers<PlainWorker, BothWorker, EarlyWorker, LateWorker>();
   const auto session = makeSession(1, TarnReportingSession::Mode::SingleMessage);
   session->start();
-  EXPECT_EQ(namesOf(session->workers().messageWorkers()), (Strings{"EarlyWorker"}));
+  EXPECT_EQ(namesOf(all(*session)), (Strings{"EarlyWorker"}));
   EXPECT_TRUE(platform_.log.contains(LogLevel::Debug,
                                      "Skipping TarnReportingSessionWorker for single message session. action=skipped "
                                      "worker=LateWorker reporterID=1"));
@@ -166,7 +169,7 @@ TEST_F(WorkerSelection, ClassThatDeclinedAtCreationIsAskedAgainAtStart) {
                                      "worker=LateWorker reporterID=7"));
   script().lateDeclines = false;
   session->start();
-  EXPECT_EQ(namesOf(session->workers().messageWorkers()), (Strings{"LateWorker"}));
+  EXPECT_EQ(namesOf(all(*session)), (Strings{"LateWorker"}));
 }
 
 TEST_F(WorkerSelection, SecondStartUsesTheSameWorkers) {

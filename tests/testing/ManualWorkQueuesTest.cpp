@@ -97,6 +97,19 @@ TEST_F(ManualWorkQueuesTest, QueueIsCurrentOnlyWhileItsWorkRunsOnTheRunningThrea
   EXPECT_FALSE(first->isCurrent());
 }
 
+TEST_F(ManualWorkQueuesTest, ServerQueueIsCurrentOnTheMakersThreadWhileNothingRuns) {
+  const auto server = queues_.makeSerialQueue("server", QualityOfService::UserInteractive);
+  EXPECT_TRUE(server->isCurrent());
+  bool elsewhere = true;
+  std::thread thread([&] { elsewhere = server->isCurrent(); });
+  thread.join();
+  EXPECT_FALSE(elsewhere);
+  bool inAnother = true;
+  queue()->async([&] { inAnother = server->isCurrent(); });
+  queues_.runUntilIdle();
+  EXPECT_FALSE(inAnother);
+}
+
 TEST_F(ManualWorkQueuesTest, NestedRunLeavesTheBusyQueueAlone) {
   const auto server = queue("server");
   const auto backEnd = queue("back-end");

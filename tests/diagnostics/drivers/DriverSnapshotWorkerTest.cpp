@@ -2,6 +2,7 @@
 #include <thread>
 
 #include "tests/diagnostics/drivers/DriverFixture.h"
+#include "tests/session/WorkersOf.h"
 
 namespace tarn {
 namespace {
@@ -13,8 +14,7 @@ class DriverSnapshotWorker : public DriverFixture {
   void count(std::int64_t value) { flume_.setChannel(simpleChannel(hapticsName("a"), value)); }
   static plist::Dictionary counted(std::int64_t value) { return {{"OxbowFoo_Haptics_Stats_Simple_a", value}}; }
   static TarnReportingSessionDriverSnapshotWorker& workerOf(TarnReportingSession& session) {
-    return dynamic_cast<TarnReportingSessionDriverSnapshotWorker&>(
-        *session.workers().producingMessageWorkers().front().worker);
+    return dynamic_cast<TarnReportingSessionDriverSnapshotWorker&>(*producersOf(session).front()->worker);
   }
   // What the session's consumers got since the last call.
   static plist::Dictionary takeCounted() {
@@ -28,7 +28,7 @@ TEST_F(DriverSnapshotWorker, DeclinesWhereThereAreNoReportChannels) {
   platform_.facilities().flume = nullptr;
   const auto session = makeSession();
   session->start();
-  EXPECT_TRUE(session->workers().producingMessageWorkers().empty());
+  EXPECT_TRUE(producersOf(*session).empty());
   EXPECT_TRUE(lines(LogLevel::Info).empty());
 }
 

@@ -38,7 +38,7 @@ class SnareFixture : public SessionFixture {
   // The session's Snare worker; null when it declined.
   static Worker* workerOf(const Session& session) {
     const auto& workers = session->workers().messageWorkers();
-    return workers.empty() ? nullptr : static_cast<Worker*>(workers.front().worker);
+    return workers.empty() ? nullptr : static_cast<Worker*>(workers.front().worker.get());
   }
   static std::vector<std::string> instanceNamesOf(const Session& session) {
     std::vector<std::string> names;

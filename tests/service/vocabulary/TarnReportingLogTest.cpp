@@ -11,6 +11,9 @@
 namespace tarn {
 namespace {
 
+constexpr TarnReportingLogger kPlainLog{TarnReportingSessionCategory, {}};
+constexpr TarnReportingLogger kModuleLog{TarnReportingClientCategory, "TarnReportingClient"};
+
 class TarnReportingLogTest : public ::testing::Test {
  protected:
   // The one line that was logged, without its prefix.
@@ -51,19 +54,38 @@ TEST_F(TarnReportingLogTest, EntryCarriesCategoryLevelModuleAndTheLineOfTheState
   EXPECT_EQ(entry.line, before + 1);
 }
 
+TEST_F(TarnReportingLogTest, LoggerOfAModuleAddsItsNameItsCategoryAndTheLineOfTheStatement) {
+  const int before = __LINE__;
+  kModuleLog(LogLevel::Error, "%@ of %i", "one", 2);
+  const auto entry = platform_.log.entries().front();
+  EXPECT_EQ(entry.category, "tarnrc");
+  EXPECT_EQ(entry.level, LogLevel::Error);
+  EXPECT_EQ(entry.module, "TarnReportingClient");
+  EXPECT_EQ(entry.line, before + 1);
+  EXPECT_EQ(message(), "one of 2");
+}
+
+TEST_F(TarnReportingLogTest, LoggerOfADisabledLevelWritesNothingAndCallsNoCallable) {
+  int calls = 0;
+  platform_.log.setThreshold(LogLevel::Error);
+  kModuleLog(LogLevel::Default, "%i", [&calls] { return ++calls; });
+  EXPECT_EQ(calls, 0);
+  EXPECT_TRUE(platform_.log.texts().empty());
+}
+
 TEST_F(TarnReportingLogTest, LongLinesAreCutBetweenCharactersAndTellHowMuchIsMissing) {
   const std::size_t limit = 65536;
-  TarnReportingLogPlain(TarnReportingSessionCategory(), LogLevel::Default, "%@", std::string(limit, 'x'));
+  kPlainLog(LogLevel::Default, "%@", std::string(limit, 'x'));
   EXPECT_EQ(platform_.log.texts().back(), std::string(limit, 'x'));
-  TarnReportingLogPlain(TarnReportingSessionCategory(), LogLevel::Default, "%@", std::string(limit + 1, 'x'));
+  kPlainLog(LogLevel::Default, "%@", std::string(limit + 1, 'x'));
   EXPECT_EQ(platform_.log.texts().back(), std::string(limit, 'x') + " ... (1 more bytes)");
   const std::string accent = "\xC3\xA9";
-  TarnReportingLogPlain(TarnReportingSessionCategory(), LogLevel::Default, "%@", std::string(limit - 1, 'x') + accent);
+  kPlainLog(LogLevel::Default, "%@", std::string(limit - 1, 'x') + accent);
   EXPECT_EQ(platform_.log.texts().back(), std::string(limit - 1, 'x') + " ... (2 more bytes)");
 }
 
 TEST_F(TarnReportingLogTest, PlainLinesCarryNoPrefix) {
-  TarnReportingLogPlain(TarnReportingSessionCategory(), LogLevel::Default, "count=%lu", std::size_t{3});
+  kPlainLog(LogLevel::Default, "count=%lu", std::size_t{3});
   const auto entry = platform_.log.entries().front();
   EXPECT_EQ(entry.text, "count=3");
   EXPECT_EQ(entry.module, "");

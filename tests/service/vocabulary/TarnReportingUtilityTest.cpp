@@ -86,6 +86,38 @@ TEST_F(TarnReportingUtilityTest, WaitLeavesTheConditionUnlockedEitherWay) {
   EXPECT_TRUE(flag_);
 }
 
+TEST_F(TarnReportingUtilityTest, SilentWaitReturnsTheFlagAndLogsNothing) {
+  EXPECT_FALSE(TarnReportingUtilityWait(*condition_, std::chrono::seconds(2), flag_));
+  EXPECT_EQ(platform_.conditions.timeouts(), (std::vector<std::chrono::duration<double>>{std::chrono::seconds(2)}));
+  flag_ = true;
+  EXPECT_TRUE(TarnReportingUtilityWait(*condition_, std::chrono::seconds(2), flag_));
+  EXPECT_EQ(platform_.conditions.timeouts().size(), 1U);
+  EXPECT_TRUE(platform_.log.texts().empty());
+}
+
+TEST_F(TarnReportingUtilityTest, SilentWaitIsNotProlongedByAWakeUpWithoutTheFlag) {
+  platform_.conditions.onWait([this](auto) {
+    platform_.clock.advance(std::chrono::seconds(1));
+    return WaitOutcome::Wakes;
+  });
+  EXPECT_FALSE(TarnReportingUtilityWait(*condition_, std::chrono::seconds(2), flag_));
+  EXPECT_EQ(platform_.conditions.timeouts(),
+            (std::vector<std::chrono::duration<double>>{std::chrono::seconds(2), std::chrono::seconds(1)}));
+}
+
+TEST_F(TarnReportingUtilityTest, SilentWaitCountsAFlagThatIsSetWhileTheTimeRunsOut) {
+  platform_.conditions.onWait([this](auto) {
+    flag_ = true;  // and nobody signalled
+    return WaitOutcome::TimesOut;
+  });
+  EXPECT_TRUE(TarnReportingUtilityWait(*condition_, std::chrono::seconds(2), flag_));
+}
+
+TEST_F(TarnReportingUtilityTest, SilentWaitOfNoTimeAsksTheFlagAlone) {
+  EXPECT_FALSE(TarnReportingUtilityWait(*condition_, std::chrono::seconds(0), flag_));
+  EXPECT_TRUE(platform_.conditions.timeouts().empty());
+}
+
 TEST_F(TarnReportingUtilityTest, SignalSetsTheFlagAndWakesOneWaiter) {
   TarnReportingUtilitySignal(*condition_, flag_);
   EXPECT_TRUE(flag_);

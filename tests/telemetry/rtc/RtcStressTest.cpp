@@ -51,7 +51,9 @@ class RtcStress : public ::testing::Test {
 
   FakePlatform platform_;
   SteadyClock clock_;
-  linux_host::LinuxWorkQueues queues_{clock_, nullptr};
+  // The caller's thread stands in for the server queue.
+  linux_host::LinuxWorkQueues queues_{
+      clock_, platform_.workQueues.makeSerialQueue("server", platform::QualityOfService::UserInteractive)};
   const platform::Facilities facilities_{.clock = platform_.clock,
                                          .workQueues = queues_,
                                          .conditions = platform_.conditions,

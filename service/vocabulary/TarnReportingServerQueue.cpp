@@ -1,0 +1,18 @@
+#include "service/vocabulary/TarnReportingServerQueue.h"
+
+#include <cstdio>
+#include <cstdlib>
+
+#include "platform/WorkQueue.h"
+#include "service/vocabulary/TarnReportingUtility.h"
+
+namespace tarn {
+
+void TarnReportingRequireServerQueue() noexcept {
+  if (!TarnReportingUtilityGetReportingServerQueue()->isCurrent()) [[unlikely]] {
+    static_cast<void>(std::fputs("tarnkit: code of the server queue was called outside it\n", stderr));
+    std::abort();
+  }
+}
+
+}  // namespace tarn

@@ -1,0 +1,10 @@
+// The check that code bound to the server queue makes of its callers.
+#pragma once
+
+namespace tarn {
+
+// Ends the process when the caller doesn't run as work of the server queue: what it is about to touch is guarded by
+// nothing else.
+void TarnReportingRequireServerQueue() noexcept;
+
+}  // namespace tarn
