@@ -52,11 +52,12 @@ void Comparison::place(const RecordedEvent& event) {
   Lane* best = nullptr;
   std::size_t fewest = SIZE_MAX;
   for (Lane& lane : lanes_) {
-    for (std::size_t skipped = 0; mayHold(lane, event) && skipped < std::min(fewest, lane.lines.size() - lane.next);
-         ++skipped) {
+    const std::size_t most = mayHold(lane, event) ? std::min(fewest, lane.lines.size() - lane.next) : 0;
+    for (std::size_t skipped = 0; skipped < most; ++skipped) {
       if (differenceOf(*lane.lines[lane.next + skipped], event, playing_).empty()) {
         best = &lane;
         fewest = skipped;
+        break;
       }
     }
   }
