@@ -40,13 +40,13 @@ TEST_F(Connections, AKilledClientsSessionsAreStoppedToo) {
 
 TEST_F(Connections, OtherClientsSessionsLiveOn) {
   const auto other = connect();
-  ASSERT_TRUE(other->createReportingSession(2).ok());
-  ASSERT_EQ(other->startReportingSessionForID(2), client::SendStatus::Sent);
+  ASSERT_TRUE(other->call(client::createReportingSession(2)).ok());
+  ASSERT_EQ(other->send(client::startReportingSessionForID(2)), client::SendStatus::Sent);
   play(
       "{\"op\":\"createReportingSession\",\"reporterID\":1}\n{\"op\":\"startReportingSessionForID\",\"reporterID\":1}"
       "\n");
   EXPECT_EQ(eventsOnceThereAre(1, kSummary).size(), 1U);
-  ASSERT_TRUE(other->sendMessage({{"a", 1}}, 4, 1, std::vector<std::int64_t>{2}).ok());
+  ASSERT_TRUE(other->call(client::sendMessage({{"a", 1}}, 4, 1, std::vector<std::int64_t>{2})).ok());
   EXPECT_EQ(eventsOnceThereAre(1, "sys.oxbow.tarnkit.Playback.Start").size(), 1U);
 }
 

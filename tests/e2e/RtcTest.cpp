@@ -189,11 +189,11 @@ TEST_F(Rtc, PeriodsThatFollowEachOtherAtOnceAreMirroredEach) {
   constexpr std::size_t kPeriods = 1000;
   ASSERT_TRUE(startService({"--log-level", "error"}));
   const auto client = connect();
-  ASSERT_TRUE(client->createReportingSession(1).ok());
+  ASSERT_TRUE(client->call(client::createReportingSession(1)).ok());
   for (std::size_t period = 0; period < kPeriods; ++period) {
-    ASSERT_EQ(client->startReportingSessionForID(1), client::SendStatus::Sent);
-    ASSERT_TRUE(client->sendMessage({{"number", period}}, 4, 1, std::vector<std::int64_t>{1}).ok());
-    ASSERT_TRUE(client->stopReportingSessionForID(1).ok());
+    ASSERT_EQ(client->send(client::startReportingSessionForID(1)), client::SendStatus::Sent);
+    ASSERT_TRUE(client->call(client::sendMessage({{"number", period}}, 4, 1, std::vector<std::int64_t>{1})).ok());
+    ASSERT_TRUE(client->call(client::stopReportingSessionForID(1)).ok());
   }
   ledgerAtRest();
   const auto found = rtcEvents();

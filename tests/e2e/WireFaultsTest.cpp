@@ -27,10 +27,10 @@ class WireFaults : public ServiceFixture {
     ASSERT_TRUE(startService());
     bystander_ = connect();
     ASSERT_TRUE(bystander_);
-    ASSERT_TRUE(bystander_->createReportingSession(1000).ok());
+    ASSERT_TRUE(bystander_->call(client::createReportingSession(1000)).ok());
   }
   void TearDown() override {
-    const client::Reply reply = bystander_->getAllReporters();
+    const client::Reply reply = bystander_->call(client::getAllReporters());
     EXPECT_TRUE(reply.ok()) << "the other client was disturbed: " << reply.error.text;
     EXPECT_EQ(reply.numbers(), std::vector<std::int64_t>{1000});
     EXPECT_TRUE(service().isRunning());
