@@ -149,9 +149,4 @@ bool Key::hasBlank() const noexcept {
   return text_->hasBlank;
 }
 
-std::size_t Key::internedCount() {
-  const std::lock_guard lock(table().mutex);
-  return table().texts.size();
-}
-
 }  // namespace tarn::plist

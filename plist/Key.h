@@ -35,8 +35,6 @@ class Key {
 
   friend bool operator==(const Key& a, const Key& b) noexcept { return a.text_ == b.text_; }
 
-  // How many distinct texts are interned now; for tests and the ledger.
-  static std::size_t internedCount();
   // The hash that a key of this text has, without interning it.
   static std::uint64_t hashOf(std::string_view text) noexcept;
 

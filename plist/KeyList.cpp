@@ -306,11 +306,6 @@ KeyList KeyList::removing(std::size_t index) const {
   return keys.empty() ? KeyList() : KeyList(internList(keys, nullptr, hashOfKeys(keys)));
 }
 
-std::size_t KeyList::aliveCount() {
-  const std::lock_guard lock(table().mutex);
-  return table().lists.size();
-}
-
 namespace detail {
 
 std::size_t indexInKeyList(const KeyListBody* body, const Key& key) noexcept {

@@ -57,9 +57,6 @@ class KeyList {
 
   friend bool operator==(const KeyList& a, const KeyList& b) noexcept { return a.body_ == b.body_; }
 
-  // How many distinct lists are alive now; for tests and the ledger.
-  static std::size_t aliveCount();
-
  private:
   friend class Dictionary;
   friend class PackedBuilder;

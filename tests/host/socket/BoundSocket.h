@@ -14,7 +14,7 @@ inline linux_host::ListenSocket::Result bindTo(const std::string& path,
     result.error = result.socket.listen(mode);
   }
   if (!result.error.empty()) {
-    result.socket = {};
+    result.socket = linux_host::ListenSocket();
   }
   return result;
 }
