@@ -88,7 +88,7 @@ TEST_F(RecorderFile, TheLedgerAddsUpAtAnyMomentAndIsZeroAtRest) {
           client::SendStatus::Sent);
     }
     ASSERT_TRUE(client->flush());
-    const plist::Dictionary ledger = watcher->status().dictionary();
+    const plist::Dictionary ledger = watcher->call(client::status()).dictionary();
     ASSERT_EQ(ledger.get("recorder_handed_over").asInt64(), ledger.get("recorder_committed").asInt64() +
                                                                 ledger.get("recorder_waiting").asInt64() +
                                                                 ledger.get("recorder_failed").asInt64());

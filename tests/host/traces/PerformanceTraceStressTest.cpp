@@ -5,6 +5,7 @@
 #include "host/machine/LinuxClock.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
 #include "service/vocabulary/TarnReportingSignpost.h"
+#include "testing/FakePlatform.h"
 #include "tests/host/traces/PerformanceTraceFixture.h"
 #include "tests/support/Seeds.h"
 
@@ -22,7 +23,8 @@ class PerformanceTraceStress : public PerformanceTraceFixture {
   class Speakers {
    public:
     explicit Speakers(platform::Signposts& signposts) {
-      detail::installSignposts(&signposts);
+      platform_.facilities().signposts = &signposts;
+      TarnReportingInstallFacilities(&platform_.facilities());
       for (int i = 0; i < kSpeakers; ++i) {
         threads_.emplace_back([this] {
           while (!ending_.load(std::memory_order_relaxed)) {
@@ -37,12 +39,12 @@ class PerformanceTraceStress : public PerformanceTraceFixture {
       for (std::thread& thread : threads_) {
         thread.join();
       }
-      detail::installSignposts(nullptr);
     }
     Speakers(const Speakers&) = delete;
     Speakers& operator=(const Speakers&) = delete;
 
    private:
+    tarn::testing::FakePlatform platform_;
     std::atomic<bool> ending_{false};
     std::vector<std::thread> threads_;
   };
