@@ -1,7 +1,7 @@
 // RecorderTallyService: the analytics-event service as the recorder stands in for it. Events of the names that the
 // configuration wants are recorded under back-end "tally"; of others not even the payload is asked for.
 //
-// Owner: the entry point. Threads: the server queue.
+// Owner: the platform. Threads: the server queue.
 #pragma once
 
 #include <cstddef>

@@ -107,9 +107,8 @@ std::string temporaryDirectoryOf(const Setup& setup) {
 recorder::RecorderRtcReportingService::Behaviour behaviourOf(const HostConfiguration::Rtc& rtc) {
   recorder::RecorderRtcReportingService::Behaviour behaviour;
   behaviour.available = rtc.available;
-  if (!rtc.noBackends) {
-    behaviour.backends = rtc.backends;
-  }
+  behaviour.backends = rtc.backends;
+  behaviour.noBackends = rtc.noBackends;
   behaviour.startDelay = rtc.startDelay;
   return behaviour;
 }
@@ -132,12 +131,12 @@ class Host final : public platform::ProcessControl {
         loop_(clock),
         connections_(loop_, log, limitsOf(setup.configuration)),
         recorder_(recorderOptionsOf(setup), log, clock),
+        workQueues_(clock, loop_.queue()),
         tally_(recorder_, clock, setup.configuration.tally.inUse),
         wattlog_(recorder_, clock),
         pylon_(recorder_, clock),
-        snare_(recorder_, clock, randomSource_, setup.configuration.snare.refuse),
-        rtc_(recorder_, clock, behaviourOf(setup.configuration.rtc)),
-        workQueues_(clock, loop_.queue()),
+        snare_(recorder_, clock, randomSource_, workQueues_, setup.configuration.snare.refuse),
+        rtc_(recorder_, clock, workQueues_, behaviourOf(setup.configuration.rtc)),
         tattle_(recorder_, clock, workQueues_),
         gyre_(recorder_, clock),
         conditions_(loop_),
@@ -254,13 +253,13 @@ class Host final : public platform::ProcessControl {
   MainLoop loop_;
   ConnectionHost connections_;
   recorder::Recorder recorder_;
+  LinuxWorkQueues workQueues_;
   recorder::RecorderTallyService tally_;
   recorder::RecorderWattlogService wattlog_;
   recorder::RecorderPylonService pylon_;
   LinuxRandomSource randomSource_;
   recorder::RecorderSnareService snare_;
   recorder::RecorderRtcReportingService rtc_;
-  LinuxWorkQueues workQueues_;
   recorder::RecorderTattleService tattle_;
   recorder::RecorderGyreService gyre_;
   LinuxConditions conditions_;
