@@ -141,7 +141,8 @@ class Host final : public platform::ProcessControl {
         gyre_(recorder_, clock),
         conditions_(loop_),
         defaults_(setup.options.stateDirectory + "/defaults", log),
-        notifications_(setup.options.stateDirectory + "/notifications", log),
+        notifications_(
+            std::make_shared<FileNotificationCenter>(setup.options.stateDirectory + "/notifications", loop_, log)),
         fileSystem_(directoriesOf(setup)),
         flumeFiles_(flumeFolderOf(setup), log),
         flume_(flumeSources(setup, log, clock)),
@@ -264,7 +265,7 @@ class Host final : public platform::ProcessControl {
   recorder::RecorderGyreService gyre_;
   LinuxConditions conditions_;
   JsonDefaultsStore defaults_;
-  FileNotificationCenter notifications_;
+  const std::shared_ptr<FileNotificationCenter> notifications_;
   LinuxProcessFacts processFacts_;
   LinuxFileSystem fileSystem_;
   FlumeFiles flumeFiles_;
@@ -291,7 +292,7 @@ class Host final : public platform::ProcessControl {
                                          .tracePoints = tracePoints_,
                                          .deviceProperties = deviceProperties_,
                                          .defaults = defaults_,
-                                         .notifications = notifications_,
+                                         .notifications = *notifications_,
                                          .processFacts = processFacts_,
                                          .processControl = *this,
                                          .tally = tally_,

@@ -36,7 +36,7 @@ ROOMS = {
     "host/log": BASE + ("host/system",),
     "host/loop": GROUND,
     "host/socket": GROUND + ("host/loop", "wire"),
-    "host/settings": GROUND,
+    "host/settings": GROUND + ("host/loop",),
     "host/machine": GROUND + ("wire",),
     "host/drivers": GROUND,
     "host/traces/analysis": (),
