@@ -85,32 +85,20 @@ int refuse(const std::string& complaint, int status) {
 }
 
 HostLimits limitsOf(const HostConfiguration& configuration) {
-  HostLimits limits;
-  limits.maxFrameBytes = configuration.limits.maximumFrameBytes;
+  HostLimits limits = configuration.limits;
   limits.maxConnections = std::min(limits.maxConnections, connectionsWithin(raiseDescriptorLimit()));
   return limits;
 }
 
 recorder::RecorderOptions recorderOptionsOf(const Setup& setup) {
-  recorder::RecorderOptions options;
+  recorder::RecorderOptions options = setup.configuration.recorder;
   options.file = setup.options.stateDirectory + "/recorder.sqlite3";
-  options.maxMegabytes = static_cast<std::int64_t>(setup.configuration.recorder.maximumMegabytes);
-  options.maxAgeDays = static_cast<double>(setup.configuration.recorder.maximumAgeDays);
   return options;
 }
 
 // Not the machine's own: the names in it are known beforehand, and nobody else is to be in the way.
 std::string temporaryDirectoryOf(const Setup& setup) {
   return setup.options.stateDirectory + "/tmp";
-}
-
-recorder::RecorderRtcReportingService::Behaviour behaviourOf(const HostConfiguration::Rtc& rtc) {
-  recorder::RecorderRtcReportingService::Behaviour behaviour;
-  behaviour.available = rtc.available;
-  behaviour.backends = rtc.backends;
-  behaviour.noBackends = rtc.noBackends;
-  behaviour.startDelay = rtc.startDelay;
-  return behaviour;
 }
 
 LinuxFileSystem::Directories directoriesOf(const Setup& setup) {
@@ -131,12 +119,12 @@ class Host final : public platform::ProcessControl {
         loop_(clock),
         connections_(loop_, log, limitsOf(setup.configuration)),
         recorder_(recorderOptionsOf(setup), log, clock),
-        workQueues_(clock, loop_.queue()),
+        workQueues_(clock, loop_.queue(), setup.configuration.limits.poolWork),
         tally_(recorder_, clock, setup.configuration.tally.inUse),
         wattlog_(recorder_, clock),
         pylon_(recorder_, clock),
         snare_(recorder_, clock, randomSource_, workQueues_, setup.configuration.snare.refuse),
-        rtc_(recorder_, clock, workQueues_, behaviourOf(setup.configuration.rtc)),
+        rtc_(recorder_, clock, workQueues_, setup.configuration.rtc),
         tattle_(recorder_, clock, workQueues_),
         gyre_(recorder_, clock),
         conditions_(loop_),
