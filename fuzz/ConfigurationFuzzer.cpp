@@ -17,9 +17,9 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   }
   const HostConfiguration& host = *read.configuration;
   const bool inRange = host.rtc.startDelay.count() >= 0 && host.rtc.startDelay.count() <= 3'600'000 &&
-                       host.recorder.maximumMegabytes >= 1 && host.recorder.maximumMegabytes <= 1048576 &&
-                       host.recorder.maximumAgeDays >= 1 && host.recorder.maximumAgeDays <= 36500 &&
-                       host.limits.maximumFrameBytes >= 64 && host.limits.maximumFrameBytes <= 67108864;
+                       host.recorder.maxMegabytes >= 1 && host.recorder.maxMegabytes <= 1048576 &&
+                       host.recorder.maxAgeDays >= 1 && host.recorder.maxAgeDays <= 36500 &&
+                       host.limits.maxFrameBytes >= 64 && host.limits.maxFrameBytes <= 67108864;
   if (!inRange || !read.error.empty()) {
     std::abort();
   }

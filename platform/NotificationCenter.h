@@ -1,4 +1,5 @@
-// NotificationCenter: named system notifications, each with a 64-bit state word. Threads: any.
+// NotificationCenter: named system notifications, each with a 64-bit state word. Threads: the queue's, but post() any.
+// server queue's.
 #pragma once
 
 #include <cstdint>

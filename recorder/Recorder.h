@@ -1,7 +1,7 @@
 // Recorder: stands in for the device's back-end services. What they would have received goes into one SQLite database,
 // events(id, time, backend, name, payload, detail), readable while it is written.
 //
-// Owner: the entry point. start() makes the writer thread, shutdown() ends it; in between nothing that was handed over
+// Owner: the platform. start() makes the writer thread, shutdown() ends it; in between nothing that was handed over
 // is lost. Events are committed in groups, at most 200 ms after their hand-over while the disk is well.
 //
 // record() takes a short lock and counts references: no text is formed, no system call is made while a commit is being

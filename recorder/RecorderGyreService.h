@@ -1,7 +1,7 @@
 // RecorderGyreService: the stack-sampling service as the recorder stands in for it: requests are recorded under
 // back-end "gyre".
 //
-// Owner: the entry point. Threads: the server queue.
+// Owner: the platform. Threads: the server queue.
 #pragma once
 
 #include "platform/Clock.h"

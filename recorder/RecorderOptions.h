@@ -37,6 +37,8 @@ struct RecorderOptions {
   // How often a shutdown tries a disk that fails before what waits is given up.
   int shutdownTries = 3;
   std::chrono::milliseconds shutdownRetry{100};
+
+  bool operator==(const RecorderOptions&) const = default;
 };
 
 }  // namespace tarn::recorder

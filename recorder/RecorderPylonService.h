@@ -1,7 +1,7 @@
 // RecorderPylonService: the metric service as the recorder stands in for it. A metric is recorded under back-end
 // "pylon" by its identifier: the fields of its text rendering, and its bytes on the wire as `wire`, in hexadecimal.
 //
-// Owner: the entry point. Threads: the server queue.
+// Owner: the platform. Threads: the server queue.
 #pragma once
 
 #include <cstdint>

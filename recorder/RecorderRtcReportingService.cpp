@@ -1,22 +1,20 @@
 #include "recorder/RecorderRtcReportingService.h"
 
-#include <condition_variable>
-#include <deque>
-#include <mutex>
-#include <thread>
 #include <utility>
 
 #include "plist/Dictionary.h"
+#include "recorder/LateReplies.h"
 #include "recorder/Recorder.h"
 
 namespace tarn::recorder {
 
 namespace {
 
-using SteadyClock = std::chrono::steady_clock;
 using plist::Dictionary;
 
 constexpr std::string_view kBackend = "rtc";
+// Completions that may be late at once; more come without their delay.
+constexpr std::size_t kMostLate = 65'536;
 
 const plist::Key kSession("session");
 const plist::Key kCategory("category");
@@ -24,72 +22,25 @@ const plist::Key kType("type");
 
 }  // namespace
 
-// The completions of starts. All are equally late, so they come in the order of the starts; without a delay they come
-// within the call.
+// The completions of starts: within the call, or late.
 class RecorderRtcReportingService::Completions {
  public:
-  using Completion = platform::RtcReportingSession::StartCompletion;
-
-  Completions(std::optional<std::vector<std::string>> backends, std::chrono::milliseconds delay)
-      : backends_(std::move(backends)), delay_(delay) {}
-  Completions(const Completions&) = delete;
-  Completions& operator=(const Completions&) = delete;
-  ~Completions() { stop(); }
-
-  void add(Completion completion) {
-    if (delay_ == std::chrono::milliseconds::zero()) {
-      completion(backends_);
-      return;
-    }
-    const std::lock_guard lock(mutex_);
-    if (stopping_) return;
-    if (!thread_.joinable()) thread_ = std::thread([this] { run(); });
-    pending_.push_back({SteadyClock::now() + delay_, std::move(completion)});
-    if (pending_.size() == 1) changed_.notify_one();
+  Completions(platform::WorkQueues& workQueues, const Behaviour& behaviour)
+      : isLate_(behaviour.startDelay != std::chrono::milliseconds::zero()),
+        late_(workQueues, {"sys.oxbow.tarnkit.recorder.rtc", kMostLate, behaviour.startDelay}) {
+    if (!behaviour.noBackends) backends_ = behaviour.backends;
   }
-  void stop() {
-    std::deque<Pending> left;  // destroyed behind the lock: each may hold the last of something
-    {
-      const std::lock_guard lock(mutex_);
-      stopping_ = true;
-      left.swap(pending_);
-    }
-    changed_.notify_one();
-    if (thread_.joinable()) thread_.join();
+
+  void add(platform::RtcReportingSession::StartCompletion completion) {
+    platform::Work complete([this, completion = std::move(completion)]() mutable { completion(backends_); });
+    if (!isLate_ || !late_.add(std::move(complete))) complete();
   }
+  void close() { late_.close(); }
 
  private:
-  struct Pending {
-    SteadyClock::time_point due;
-    Completion completion;
-  };
-
-  void run() {
-    std::unique_lock lock(mutex_);
-    while (!stopping_) {
-      if (pending_.empty()) {
-        changed_.wait(lock);
-      } else if (const auto due = pending_.front().due; SteadyClock::now() < due) {
-        changed_.wait_until(lock, due);
-      } else {
-        Completion completion = std::move(pending_.front().completion);
-        pending_.pop_front();
-        lock.unlock();
-        completion(backends_);
-        completion.reset();
-        lock.lock();
-      }
-    }
-  }
-
-  const std::optional<std::vector<std::string>> backends_;
-  const std::chrono::milliseconds delay_;
-  std::mutex mutex_;
-  std::condition_variable changed_;
-  // Guarded by mutex_.
-  std::deque<Pending> pending_;
-  std::thread thread_;
-  bool stopping_ = false;
+  std::optional<std::vector<std::string>> backends_;
+  const bool isLate_;
+  LateReplies late_;
 };
 
 class RecorderRtcReportingService::Session final : public platform::RtcReportingSession {
@@ -118,14 +69,14 @@ class RecorderRtcReportingService::Session final : public platform::RtcReporting
 };
 
 RecorderRtcReportingService::RecorderRtcReportingService(Recorder& recorder, const platform::Clock& clock,
-                                                         Behaviour behaviour)
+                                                         platform::WorkQueues& workQueues, const Behaviour& behaviour)
     : recorder_(recorder),
       clock_(clock),
       available_(behaviour.available),
-      completions_(std::make_shared<Completions>(std::move(behaviour.backends), behaviour.startDelay)) {}
+      completions_(std::make_shared<Completions>(workQueues, behaviour)) {}
 
 RecorderRtcReportingService::~RecorderRtcReportingService() {
-  completions_->stop();
+  completions_->close();
 }
 
 std::optional<std::string> RecorderRtcReportingService::newHierarchyToken(const std::optional<std::string>&) {

@@ -3,10 +3,10 @@
 // 1 in each run.
 //
 // How it answers is told by the configuration: which backends a start finds, how late it says so, and whether it hands
-// out tokens at all. Without a delay a completion comes within the call of the start. Late ones come on a thread of
-// their own, each at its moment, so one holds up no other.
+// out tokens at all. Without a delay a completion comes within the call of the start. Late ones come on a queue of
+// their own (see LateReplies), each at its moment.
 //
-// Owner: the entry point; sessions may outlive it, but not the recorder. Threads: any.
+// Owner: the platform; sessions may outlive it, but not the recorder. Threads: any.
 #pragma once
 
 #include <atomic>
@@ -19,6 +19,7 @@
 
 #include "platform/Clock.h"
 #include "platform/RtcReportingService.h"
+#include "platform/WorkQueue.h"
 
 namespace tarn::recorder {
 
@@ -27,13 +28,16 @@ class Recorder;
 class RecorderRtcReportingService final : public platform::RtcReportingService {
  public:
   struct Behaviour {
-    bool available = true;                               // false: no token is handed out
-    std::optional<std::vector<std::string>> backends{};  // what a start's completion reports; nothing: no list
-    std::chrono::milliseconds startDelay{0};             // how late it comes
+    bool available = true;                          // false: no token is handed out
+    std::vector<std::string> backends{"recorder"};  // what a start's completion reports
+    bool noBackends = false;                        // it reports no list at all
+    std::chrono::milliseconds startDelay{0};        // how late it comes
+    bool operator==(const Behaviour&) const = default;
   };
 
-  // The recorder and the clock outlive this and its sessions.
-  RecorderRtcReportingService(Recorder& recorder, const platform::Clock& clock, Behaviour behaviour);
+  // The recorder and the clock outlive this and its sessions, the work queues this.
+  RecorderRtcReportingService(Recorder& recorder, const platform::Clock& clock, platform::WorkQueues& workQueues,
+                              const Behaviour& behaviour);
   RecorderRtcReportingService(const RecorderRtcReportingService&) = delete;
   RecorderRtcReportingService& operator=(const RecorderRtcReportingService&) = delete;
   // Completions that have not come by then never come.

@@ -1,15 +1,11 @@
 #include "recorder/RecorderSnareService.h"
 
 #include <array>
-#include <condition_variable>
 #include <cstdint>
-#include <deque>
-#include <mutex>
 #include <string>
-#include <system_error>
-#include <thread>
 #include <utility>
 
+#include "recorder/LateReplies.h"
 #include "recorder/Recorder.h"
 
 namespace tarn::recorder {
@@ -35,71 +31,36 @@ std::string freshIdentifier(platform::RandomSource& randomSource) {
 
 }  // namespace
 
-// What the service and its reporters share: where requests are taken, and the thread that answers them.
-class RecorderSnareService::Desk {
+// What the service and its reporters share: where requests are taken and answered.
+class RecorderSnareService::Intake {
  public:
-  Desk(Recorder& recorder, const platform::Clock& clock, platform::RandomSource& randomSource,
-       std::optional<platform::SnareReason> refuse)
-      : recorder_(recorder), clock_(clock), randomSource_(randomSource), refuse_(refuse) {}
+  Intake(Recorder& recorder, const platform::Clock& clock, platform::RandomSource& randomSource,
+         platform::WorkQueues& workQueues, std::optional<platform::SnareReason> refuse)
+      : recorder_(recorder),
+        clock_(clock),
+        randomSource_(randomSource),
+        refuse_(refuse),
+        replies_(workQueues, {"sys.oxbow.tarnkit.recorder.snare", kMostWaitingReplies}) {}
 
-  // Takes a request; whether it did.
+  // Takes a request; whether it did. It is recorded before it is answered.
   bool take(std::string_view name, const platform::SnareRequest& request, ReplyHandler handler) {
-    const std::lock_guard lock(mutex_);
-    if (closed_ || waiting_.size() >= kMostWaitingReplies || !ensureThread()) return false;
-    record(name, request.payload.value_or(plist::Dictionary()),
-           {{"signature", request.signature}, {"duration", request.durationSeconds}});
-    waiting_.push_back(std::move(handler));
-    work_.notify_one();
-    return true;
+    return replies_.add([this, handler = std::move(handler)]() mutable { handler(reply()); },
+                        [&] {
+                          record(name, request.payload.value_or(plist::Dictionary()),
+                                 {{"signature", request.signature}, {"duration", request.durationSeconds}});
+                        });
   }
 
   void cancel(std::string_view sessionIdentifier) {
-    const std::lock_guard lock(mutex_);
-    if (!closed_) record("cancelSession", {}, {{"session", sessionIdentifier}});
+    replies_.ifOpen([&] { record("cancelSession", {}, {{"session", sessionIdentifier}}); });
   }
 
-  // Takes nothing more, and ends the thread.
-  void close() {
-    std::deque<ReplyHandler> dropped;  // behind the lock: a handler may have the last of something
-    std::thread thread;
-    {
-      const std::lock_guard lock(mutex_);
-      closed_ = true;
-      dropped.swap(waiting_);
-      thread.swap(thread_);
-      work_.notify_one();
-    }
-    if (thread.joinable()) thread.join();
-  }
+  // Takes and answers nothing more.
+  void close() { replies_.close(); }
 
  private:
   void record(std::string_view name, plist::Dictionary payload, plist::Dictionary detail) {
     recorder_.record(kBackend, name, std::move(payload), std::move(detail), clock_.epochSeconds());
-  }
-
-  bool ensureThread() {
-    if (thread_.joinable()) return true;
-    try {
-      thread_ = std::thread([this] { answer(); });
-    } catch (const std::system_error&) {
-      return false;
-    }
-    return true;
-  }
-
-  void answer() {
-    std::unique_lock lock(mutex_);
-    while (true) {
-      work_.wait(lock, [this] { return closed_ || !waiting_.empty(); });
-      if (closed_) return;
-      {
-        ReplyHandler handler = std::move(waiting_.front());
-        waiting_.pop_front();
-        lock.unlock();
-        handler(reply());
-      }
-      lock.lock();
-    }
   }
 
   plist::Dictionary reply() {
@@ -113,18 +74,12 @@ class RecorderSnareService::Desk {
   const platform::Clock& clock_;
   platform::RandomSource& randomSource_;
   const std::optional<platform::SnareReason> refuse_;
-
-  std::mutex mutex_;
-  std::condition_variable work_;
-  // Guarded by mutex_.
-  std::deque<ReplyHandler> waiting_;
-  std::thread thread_;
-  bool closed_ = false;
+  LateReplies replies_;
 };
 
 class RecorderSnareService::Reporter final : public platform::SnareReporter {
  public:
-  explicit Reporter(std::shared_ptr<Desk> desk) : desk_(std::move(desk)) {}
+  explicit Reporter(std::shared_ptr<Intake> intake) : intake_(std::move(intake)) {}
 
   plist::Dictionary makeSignature(const platform::SnareSignature& signature) override {
     using Keys = platform::SnareSignatureKeys;
@@ -138,30 +93,30 @@ class RecorderSnareService::Reporter final : public platform::SnareReporter {
   }
 
   bool requestSnapshot(const platform::SnareRequest& request, ReplyHandler reply) override {
-    return desk_->take("requestSnapshot", request, std::move(reply));
+    return intake_->take("requestSnapshot", request, std::move(reply));
   }
 
   bool startSession(const platform::SnareRequest& request, ReplyHandler reply) override {
-    return desk_->take("startSession", request, std::move(reply));
+    return intake_->take("startSession", request, std::move(reply));
   }
 
-  void cancelSession(std::string_view sessionIdentifier) override { desk_->cancel(sessionIdentifier); }
+  void cancelSession(std::string_view sessionIdentifier) override { intake_->cancel(sessionIdentifier); }
 
  private:
-  const std::shared_ptr<Desk> desk_;
+  const std::shared_ptr<Intake> intake_;
 };
 
 RecorderSnareService::RecorderSnareService(Recorder& recorder, const platform::Clock& clock,
-                                           platform::RandomSource& randomSource,
+                                           platform::RandomSource& randomSource, platform::WorkQueues& workQueues,
                                            std::optional<platform::SnareReason> refuse)
-    : desk_(std::make_shared<Desk>(recorder, clock, randomSource, refuse)) {}
+    : intake_(std::make_shared<Intake>(recorder, clock, randomSource, workQueues, refuse)) {}
 
 RecorderSnareService::~RecorderSnareService() {
-  desk_->close();
+  intake_->close();
 }
 
 std::shared_ptr<platform::SnareReporter> RecorderSnareService::createReporter() {
-  return std::make_shared<Reporter>(desk_);
+  return std::make_shared<Reporter>(intake_);
 }
 
 }  // namespace tarn::recorder

@@ -1,14 +1,14 @@
 // RecorderSnareService: the bug-capture service as the recorder stands in for it. Requests and cancels are recorded
-// under back-end "snare" when they are made; the replies come on a thread of the service's own.
+// under back-end "snare" when they are made; the replies come on a queue of the service's own.
 //
 // Each request is answered with a fresh session identifier, or, when the configuration wants refusals, with no success
 // and that reason. A request that is answered with a refusal was taken all the same, so it is recorded like any other.
-// One that can't be answered, because too many wait for their reply or no thread can be made, is not accepted: not
-// recorded, and its handler is dropped.
+// One that can't be answered, because too many wait for their reply, is not accepted: not recorded, and its handler is
+// dropped.
 //
-// Owner: the entry point. Threads: requests on any; handlers on the service's thread, which is made by the first
-// request. The destructor waits for the handler that runs and drops the replies that wait. Reporters may outlive the
-// service: then they accept nothing and record nothing.
+// Owner: the platform. Threads: requests on any; handlers on the service's queue (see LateReplies). The destructor
+// waits for the handler that runs and drops the replies that wait. Reporters may outlive the service: then they accept
+// nothing and record nothing.
 #pragma once
 
 #include <cstddef>
@@ -18,6 +18,7 @@
 #include "platform/Clock.h"
 #include "platform/RandomSource.h"
 #include "platform/SnareService.h"
+#include "platform/WorkQueue.h"
 
 namespace tarn::recorder {
 
@@ -30,7 +31,7 @@ class RecorderSnareService : public platform::SnareService {
 
   // `refuse`: the reason with which all requests are refused. The others outlive this.
   RecorderSnareService(Recorder& recorder, const platform::Clock& clock, platform::RandomSource& randomSource,
-                       std::optional<platform::SnareReason> refuse);
+                       platform::WorkQueues& workQueues, std::optional<platform::SnareReason> refuse);
   ~RecorderSnareService() override;
   RecorderSnareService(const RecorderSnareService&) = delete;
   RecorderSnareService& operator=(const RecorderSnareService&) = delete;
@@ -38,10 +39,10 @@ class RecorderSnareService : public platform::SnareService {
   std::shared_ptr<platform::SnareReporter> createReporter() override;
 
  private:
-  class Desk;
+  class Intake;
   class Reporter;
 
-  const std::shared_ptr<Desk> desk_;
+  const std::shared_ptr<Intake> intake_;
 };
 
 }  // namespace tarn::recorder

@@ -1,7 +1,7 @@
 // RecorderTallyService: the analytics-event service as the recorder stands in for it. The configuration says which
 // names are in use; what is handed over is recorded under back-end "tally".
 //
-// Owner: the entry point. Threads: the server queue.
+// Owner: the platform. Threads: the server queue.
 #pragma once
 
 #include <cstddef>

@@ -30,11 +30,8 @@ void RecorderTattleService::createDraft(const platform::TattleDraft& draft,
   if (processName) detail.set("process", *processName);
   detail.set("reason", displayReason);
   recorder_.record("tattle", "createDraft", payloadOf(draft), detail, clock_.epochSeconds());
-  if (!completions_) {
-    completions_ =
-        workQueues_.makeSerialQueue("sys.oxbow.tarnkit.recorder.tattle", platform::QualityOfService::Utility);
-  }
-  completions_->async([completion = std::move(completion)]() mutable { completion(std::nullopt); });
+  platform::Work complete([completion = std::move(completion)]() mutable { completion(std::nullopt); });
+  if (!completions_.add(std::move(complete))) complete();
 }
 
 }  // namespace tarn::recorder

@@ -1,10 +1,10 @@
 // RecorderTattleService: the bug-filing prompt as the recorder stands in for it: drafts are recorded under back-end
 // "tattle". There is nobody to ask, so every draft counts as taken.
 //
-// Owner: the entry point. Threads: requests on the server queue; completions on a queue of its own.
+// Owner: the platform. Threads: requests on the server queue; completions on a queue of its own (see LateReplies), or
+// within the call of a request that comes while too many wait.
 #pragma once
 
-#include <memory>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -12,6 +12,7 @@
 #include "platform/Clock.h"
 #include "platform/TattleService.h"
 #include "platform/WorkQueue.h"
+#include "recorder/LateReplies.h"
 
 namespace tarn::recorder {
 
@@ -21,7 +22,7 @@ class RecorderTattleService : public platform::TattleService {
  public:
   // All outlive this.
   RecorderTattleService(Recorder& recorder, const platform::Clock& clock, platform::WorkQueues& workQueues)
-      : recorder_(recorder), clock_(clock), workQueues_(workQueues) {}
+      : recorder_(recorder), clock_(clock), completions_(workQueues, {"sys.oxbow.tarnkit.recorder.tattle"}) {}
 
   void createDraft(const platform::TattleDraft& draft, const std::optional<std::string>& processName,
                    std::string_view displayReason, Completion completion) override;
@@ -29,8 +30,7 @@ class RecorderTattleService : public platform::TattleService {
  private:
   Recorder& recorder_;
   const platform::Clock& clock_;
-  platform::WorkQueues& workQueues_;
-  std::shared_ptr<platform::WorkQueue> completions_;  // made with the first draft: most devices never see one
+  LateReplies completions_;
 };
 
 }  // namespace tarn::recorder

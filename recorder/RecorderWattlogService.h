@@ -1,7 +1,7 @@
 // RecorderWattlogService: the power log as the recorder stands in for it. An event is recorded under back-end "wattlog"
 // by its name, with the agent that logged it as `agent`.
 //
-// Owner: the entry point. Threads: the server queue.
+// Owner: the platform. Threads: the server queue.
 #pragma once
 
 #include <cstdint>

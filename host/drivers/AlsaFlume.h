@@ -20,7 +20,7 @@
 // A substream that can't be read is one complaint in the log until it changes, and is left out. A machine without sound
 // hardware has no channels and nothing to complain about. What is beyond the bounds is left out and told once.
 //
-// Owner: the entry point; log and clock outlive it. Threads: the server queue.
+// Owner: the platform; log and clock outlive it. Threads: the server queue.
 #pragma once
 
 #include <array>

@@ -9,7 +9,7 @@
 //
 // Pipes, devices and sockets are never opened. Nothing is written.
 //
-// Owner: the entry point; the log outlives it. Threads: the server queue.
+// Owner: the platform; the log outlives it. Threads: the server queue.
 #pragma once
 
 #include <cstddef>

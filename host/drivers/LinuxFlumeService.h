@@ -7,7 +7,7 @@
 // A difference takes buckets by their position and states by their name. A value is later minus earlier, also below
 // zero. A channel that changed its format counts as it is now.
 //
-// Owner: the entry point; the sources outlive it. Threads: those of the sources.
+// Owner: the platform; the sources outlive it. Threads: those of the sources.
 #pragma once
 
 #include <memory>

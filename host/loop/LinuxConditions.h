@@ -1,7 +1,7 @@
 // LinuxConditions: condition variables. A wait on the server queue, and work that blocks it on purpose, is told to the
 // watchdog; while a wait lasts, the main loop serves its sockets.
 //
-// Owned by the entry point; outlives the conditions that it made. Threads: any.
+// Owned by the platform; outlives the conditions that it made. Threads: any.
 #pragma once
 
 #include "host/loop/MainLoop.h"

@@ -4,7 +4,7 @@
 // What waits on the pool's queues is bounded by whoever takes work in from outside: it stops while isFull() is true and
 // goes on when the room handler is called.
 //
-// Owned by the entry point; the queues that it made may outlive it, but then run nothing more. Threads: any.
+// Owned by the platform; the queues that it made may outlive it, but then run nothing more. Threads: any.
 #pragma once
 
 #include <memory>

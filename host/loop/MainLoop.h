@@ -7,7 +7,7 @@
 // so neither starves the other; a piece of work that blocks holds up the sockets, which slows clients and loses
 // nothing. A piece that waits on purpose serves them meanwhile, with waitUntil().
 //
-// Owned by the entry point; outlives what it watches. Threads: stop() and the queue any; the rest only the loop's
+// Owned by the platform; outlives what it watches. Threads: stop() and the queue any; the rest only the loop's
 // thread (or before run()).
 #pragma once
 

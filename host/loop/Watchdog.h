@@ -1,7 +1,7 @@
 // Watchdog: tells the service manager, when it asks for that, that the server queue is alive. A queue that hangs gets
 // no ping, and the manager restarts the service.
 //
-// Owned by the entry point. start() makes a thread of its own, so that a busy queue can be told from a hung one.
+// Owned by the platform. start() makes a thread of its own, so that a busy queue can be told from a hung one.
 #pragma once
 
 #include <chrono>

@@ -40,6 +40,7 @@ class WorkerPool {
   struct Marks {
     std::size_t high = 262'144;
     std::size_t low = 131'072;
+    bool operator==(const Marks&) const = default;
   };
   using RoomHandler = platform::UniqueFunction<void()>;
 

@@ -1,40 +1,43 @@
-// FileNotificationCenter: named notifications as files, notifications/NAME: 8 bytes, little-endian, the state word.
+// FileNotificationCenter: the notifications of a NotificationFolder, watched by the main loop.
 //
-// One write to the file is one post, by whatever process, this one included; so is another file taking its name. A
-// thread of its own watches the folder and hands each registration's handler to its queue. Posts that come while a
-// delivery still waits there are delivered with it, so a flood of posts costs one piece of work a registration. When
-// the kernel lost count of the changes, every registration is called once. A folder that vanishes is made anew; after
-// that every registration is called once as well.
+// One write to a file is one post, by whatever process, this one included; so is another file taking its name. Each
+// registration's handler is handed to its queue. Posts that come while a delivery still waits there are delivered with
+// it, so a flood of posts costs one piece of work a registration. When the kernel lost count of the changes, every
+// registration is called once. A folder that vanishes is made anew; after that every registration is called once as
+// well.
 //
 // Which problem cancel() solves on the queue: the delivery that already waits there finds its registration cancelled.
 //
-// Bounds: 1024 registrations. Threads: any; the thread starts with the first registration and ends with the object.
+// Owner: the platform, and the loop while it watches. Bounds: 1024 registrations. Threads: post() any; the rest the
+// main loop's, or before it runs, and the queues of registrations are served there.
 #pragma once
 
-#include <atomic>
 #include <cstddef>
+#include <cstdint>
 #include <map>
 #include <memory>
-#include <mutex>
 #include <string>
-#include <thread>
-#include <vector>
+#include <string_view>
 
+#include "host/loop/MainLoop.h"
+#include "host/settings/NotificationFolder.h"
 #include "host/system/UniqueDescriptor.h"
 #include "platform/Log.h"
 #include "platform/NotificationCenter.h"
 
 namespace tarn::linux_host {
 
-class FileNotificationCenter final : public platform::NotificationCenter {
+class FileNotificationCenter final : public platform::NotificationCenter,
+                                     public EventHandler,
+                                     public std::enable_shared_from_this<FileNotificationCenter> {
  public:
   static constexpr std::size_t kMaximumRegistrations = 1024;
 
-  // `folder` holds the notifications' files; it is made when it is needed. The log must outlive the center.
-  FileNotificationCenter(std::string folder, platform::Log& log);
+  // Loop and log outlive the center.
+  FileNotificationCenter(std::string folder, MainLoop& loop, platform::Log& log);
   FileNotificationCenter(const FileNotificationCenter&) = delete;
   FileNotificationCenter& operator=(const FileNotificationCenter&) = delete;
-  ~FileNotificationCenter() override;
+  ~FileNotificationCenter() override = default;
 
   // The status of a failed registration is an errno value: EINVAL for a name that is no plain file name, ENOSPC beyond
   // the bound, else what the kernel said. A post that was made just before may be delivered too.
@@ -42,43 +45,37 @@ class FileNotificationCenter final : public platform::NotificationCenter {
   // Nothing for an unknown token and for a file that is missing, short or unreadable.
   std::optional<std::uint64_t> state(std::int32_t token) const override;
   void cancel(std::int32_t token) override;
-  // Writers of a state word take turns, each waiting at most a second. A failure is logged.
+  // A failure is logged.
   [[nodiscard]] bool post(std::string_view name, std::optional<std::uint64_t> state) override;
 
-  // Sets the word, if given, and posts; empty, or what went wrong. Nothing is logged.
-  [[nodiscard]] std::string write(std::string_view name, std::optional<std::uint64_t> state) const;
+  void handleEvents(std::uint32_t events) override;
 
  private:
   struct Entry {
-    Entry(std::string itsName, std::int32_t itsToken, std::shared_ptr<platform::WorkQueue> itsQueue,
-          Handler itsHandler);
     const std::string name;
     const std::int32_t token;
     const std::shared_ptr<platform::WorkQueue> queue;
-    Handler handler;                   // called on the queue only
-    std::atomic<bool> waiting{false};  // a delivery is on the queue
-    std::atomic<bool> cancelled{false};
+    Handler handler;
+    bool waiting = false;  // a delivery is on the queue
+    bool cancelled = false;
   };
 
   int startWatching();
   int watchFolder();
-  void watch();
-  bool readEvents();
   void handleEvent(int watch, std::uint32_t mask, std::string_view name);
   void renewWatch();
   void deliver(std::string_view name);
   void deliverAll();
-  static void handOver(const std::vector<std::shared_ptr<Entry>>& entries);
+  static void handOver(const std::shared_ptr<Entry>& entry);
 
-  const std::string folder_;
+  const NotificationFolder folder_;
+  MainLoop& loop_;
   platform::Log& log_;
-  mutable std::mutex mutex_;
-  std::map<std::int32_t, std::shared_ptr<Entry>> entries_;  // guarded by mutex_, as is lastToken_
+  std::map<std::int32_t, std::shared_ptr<Entry>> entries_;
   std::int32_t lastToken_ = 0;
-  UniqueDescriptor events_;  // made before the thread starts, as are stop_ and the first watch_
-  UniqueDescriptor stop_;
-  int watch_ = -1;      // the thread's own once it runs; negative while the folder can't be watched
-  std::thread thread_;  // guarded by mutex_
+  UniqueDescriptor events_;
+  bool watched_ = false;  // the loop watches events_: from the first registration on
+  int watch_ = -1;        // negative while the folder can't be watched
 };
 
 }  // namespace tarn::linux_host

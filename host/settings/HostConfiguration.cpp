@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <array>
-#include <concepts>
 
 // Results instead of exceptions, and nothing to link.
 #define TOML_EXCEPTIONS 0
@@ -91,7 +90,7 @@ Complaint takeWhole(const toml::node& node, std::int64_t lowest, std::int64_t hi
   return "";
 }
 
-template <std::int64_t kLowest, std::int64_t kHighest, std::unsigned_integral Number>
+template <std::int64_t kLowest, std::int64_t kHighest, class Number>
 Complaint takeWithin(const toml::node& node, Number& setting) {
   std::int64_t number = static_cast<std::int64_t>(setting);
   Complaint complaint = takeWhole(node, kLowest, kHighest, number);
@@ -127,11 +126,11 @@ constexpr std::array<Setting, 13> kSettings{{
     {"paths", "trace_analysis",
      [](Node node, Host host) { return takePath(node, "a file", host.paths.traceAnalysis); }},
     {"recorder", "max_megabytes",
-     [](Node node, Host host) { return takeWithin<1, 1048576>(node, host.recorder.maximumMegabytes); }},
+     [](Node node, Host host) { return takeWithin<1, 1048576>(node, host.recorder.maxMegabytes); }},
     {"recorder", "max_age_days",
-     [](Node node, Host host) { return takeWithin<1, 36500>(node, host.recorder.maximumAgeDays); }},
+     [](Node node, Host host) { return takeWithin<1, 36500>(node, host.recorder.maxAgeDays); }},
     {"limits", "max_frame_bytes",
-     [](Node node, Host host) { return takeWithin<64, 67108864>(node, host.limits.maximumFrameBytes); }},
+     [](Node node, Host host) { return takeWithin<64, 67108864>(node, host.limits.maxFrameBytes); }},
 }};
 
 bool isSection(std::string_view name) {

@@ -1,51 +1,45 @@
-// HostConfiguration: the service's configuration file (TOML), as one struct. What the file leaves out has the value
-// shown here. Unknown keys, wrong types and values outside their range are errors. Threads: any; plain data.
+// HostConfiguration: the service's configuration file (TOML), read into the structures that use it. What the file
+// leaves out keeps its default there. Unknown keys, wrong types and values outside their range are errors. Threads:
+// any; plain data.
 #pragma once
 
-#include <chrono>
-#include <cstdint>
 #include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
 
+#include "host/socket/HostLimits.h"
 #include "platform/SnareService.h"
+#include "recorder/RecorderOptions.h"
+#include "recorder/RecorderRtcReportingService.h"
 
 namespace tarn::linux_host {
 
 struct HostConfiguration {
   struct Tally {
     std::vector<std::string> inUse{"*"};  // glob patterns of the event names that somebody wants
-  };
-  struct Rtc {
-    std::vector<std::string> backends{"recorder"};  // what the backend's start completion reports
-    bool noBackends = false;                        // it reports no list at all
-    bool available = true;                          // a hierarchy token is handed out
-    std::chrono::milliseconds startDelay{0};        // how late the start completion comes; at most an hour
+    bool operator==(const Tally&) const = default;
   };
   struct Snare {
     std::optional<platform::SnareReason> refuse;  // with what bug captures are refused; empty in the file: they aren't
+    bool operator==(const Snare&) const = default;
   };
   struct Paths {
     std::optional<std::string> diagnosticLogs;  // the folder that holds DiagnosticLogs/; else the state directory
     std::optional<std::string> flume;  // the folder of driver report channels; else flume/ in the state directory
     std::optional<std::string> alsa;   // the kernel's tree of sound hardware; else none is looked at
     std::optional<std::string> traceAnalysis;  // the trace-analysis library; else the one beside the program
-  };
-  struct Recorder {
-    std::uint64_t maximumMegabytes = 256;  // 1 to 1048576
-    std::uint64_t maximumAgeDays = 30;     // 1 to 36500
-  };
-  struct Limits {
-    std::uint32_t maximumFrameBytes = 1048576;  // 64 to 67108864
+    bool operator==(const Paths&) const = default;
   };
 
   Tally tally;
-  Rtc rtc;
+  tarn::recorder::RecorderRtcReportingService::Behaviour rtc;
   Snare snare;
   Paths paths;
-  Recorder recorder;
-  Limits limits;
+  tarn::recorder::RecorderOptions recorder;
+  HostLimits limits;
+
+  bool operator==(const HostConfiguration&) const = default;
 };
 
 struct ReadConfiguration {

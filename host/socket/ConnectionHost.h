@@ -1,6 +1,6 @@
 // ConnectionHost: what all connections of the listener share.
 //
-// Owned by the entry point; outlives the listener and the connections. Threads: the main loop's, but for
+// Owned by the platform; outlives the listener and the connections. Threads: the main loop's, but for
 // resumeRequests().
 #pragma once
 

@@ -1,8 +1,10 @@
 // HostLimits: every bound that protects the service from its clients, and what happens when it is reached.
 #pragma once
 
+#include <chrono>
 #include <cstddef>
 
+#include "host/loop/WorkerPool.h"
 #include "wire/Operation.h"
 
 namespace tarn::linux_host {
@@ -20,6 +22,12 @@ struct HostLimits {
   std::size_t maxConnections = 4096;
   // Up to so many open connections keep their input buffers while they are quiet.
   std::size_t keptBuffers = 64;
+  // Pieces of work of the workers' own queues; beyond the high mark connections stop likewise, until the low one.
+  WorkerPool::Marks poolWork;
+  // For how long the end waits for those queues without seeing them get shorter; then what is left stays undone.
+  std::chrono::milliseconds settleTime{500};
+
+  bool operator==(const HostLimits&) const = default;
 };
 
 }  // namespace tarn::linux_host

@@ -3,7 +3,7 @@
 // When the system has no descriptors left, or as many connections are open as may be, it stops accepting for a moment
 // and tries again: the others wait in the socket's backlog, and the log tells it once.
 //
-// Owned by the entry point; held by the loop as well while it accepts. Threads: the main loop's.
+// Owned by the platform; held by the loop as well while it accepts. Threads: the main loop's.
 #pragma once
 
 #include <memory>

@@ -15,7 +15,7 @@
 // A start that follows another, and a stop of what isn't a valid trace, do nothing. A callback that is under way while
 // its session is let go of comes to its end; the delegate lives as long as it takes.
 //
-// Owner: the entry point. Threads: any. Files are written and callbacks made on one thread of its own, which exists
+// Owner: the platform. Threads: any. Files are written and callbacks made on one thread of its own, which exists
 // from the first session on.
 #pragma once
 

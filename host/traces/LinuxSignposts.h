@@ -1,6 +1,6 @@
 // LinuxSignposts: hands the signposts that are set to the traces that record.
 //
-// Owner: the entry point; it outlives every trace. Threads: any, with one lock while something records.
+// Owner: the platform; it outlives every trace. Threads: any, with one lock while something records.
 #pragma once
 
 #include <memory>

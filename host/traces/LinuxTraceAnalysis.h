@@ -1,7 +1,7 @@
 // LinuxTraceAnalysis: the trace-analysis library as a shared object (see analysis/TraceAnalysisFactory.h), loaded on
 // the first call and kept. Why one can't be loaded, and descriptions that it refuses, are told in the log.
 //
-// Owner: the entry point; traces and libraries that it handed out may outlive it. Threads: the server queue.
+// Owner: the platform; traces and libraries that it handed out may outlive it. Threads: the server queue.
 #pragma once
 
 #include <optional>

@@ -3,6 +3,7 @@
 #include <future>
 #include <thread>
 
+#include "testing/ManualWorkQueues.h"
 #include "tests/recorder/RecorderFixture.h"
 
 namespace tarn::recorder {
@@ -15,8 +16,8 @@ class RecorderRtcReportingServiceTest : public RecorderFixture {
  protected:
   using Behaviour = RecorderRtcReportingService::Behaviour;
 
-  std::unique_ptr<RecorderRtcReportingService> makeService(Behaviour behaviour) {
-    return std::make_unique<RecorderRtcReportingService>(start(), clock_, std::move(behaviour));
+  std::unique_ptr<RecorderRtcReportingService> makeService(const Behaviour& behaviour) {
+    return std::make_unique<RecorderRtcReportingService>(start(), clock_, workQueues_, behaviour);
   }
   static std::shared_ptr<platform::RtcReportingSession> makeSession(RecorderRtcReportingService& service) {
     return service.createSession({}, {}, {});
@@ -31,6 +32,8 @@ class RecorderRtcReportingServiceTest : public RecorderFixture {
     EXPECT_TRUE(flush());
     return ask(file(), "SELECT time, backend, name, payload, detail FROM events ORDER BY id");
   }
+
+  tarn::testing::ManualWorkQueues workQueues_{clock_};
 };
 
 TEST_F(RecorderRtcReportingServiceTest, RecordsASessionItsMessagesAndItsFlushes) {
@@ -63,13 +66,14 @@ TEST_F(RecorderRtcReportingServiceTest, SessionsCountFromOneAndTokensAreTexts) {
 }
 
 TEST_F(RecorderRtcReportingServiceTest, UnavailableServiceHandsOutNoToken) {
-  const auto service = makeService({.available = false, .backends = {}});
+  const auto service = makeService({.available = false});
   EXPECT_EQ(service->newHierarchyToken({}), std::nullopt);
 }
 
 TEST_F(RecorderRtcReportingServiceTest, CompletionReportsTheListAnEmptyOneOrNone) {
   for (const Backends& backends : {Backends({"a", "b"}), Backends(std::vector<std::string>()), Backends()}) {
-    const auto service = makeService({.backends = backends});
+    const auto service =
+        makeService({.backends = backends.value_or(std::vector<std::string>{"unseen"}), .noBackends = !backends});
     EXPECT_EQ(backendsOf(*makeSession(*service)), backends);
   }
 }
@@ -81,27 +85,27 @@ TEST_F(RecorderRtcReportingServiceTest, CompletionWithoutADelayComesWithinTheCal
   EXPECT_EQ(thread, std::this_thread::get_id());
 }
 
-TEST_F(RecorderRtcReportingServiceTest, LateCompletionComesOnAThreadOfItsOwn) {
+TEST_F(RecorderRtcReportingServiceTest, LateCompletionComesOnAQueueOfItsOwn) {
   const auto service = makeService({.startDelay = 1ms});
-  std::promise<std::thread::id> thread;
-  makeSession(*service)->startConfiguration([&](const Backends&) { thread.set_value(std::this_thread::get_id()); });
-  EXPECT_NE(thread.get_future().get(), std::this_thread::get_id());
+  EXPECT_TRUE(workQueues_.names().empty());
+  int calls = 0;
+  makeSession(*service)->startConfiguration([&](const Backends&) { ++calls; });
+  makeSession(*service)->startConfiguration([&](const Backends&) { ++calls; });
+  EXPECT_EQ(workQueues_.names().size(), 1U);
+  EXPECT_EQ(calls, 0);
+  workQueues_.advance(1ms);
+  EXPECT_EQ(calls, 2);
 }
 
 TEST_F(RecorderRtcReportingServiceTest, CompletionComesByItsDelayNeverEarlyAndInOrder) {
   const auto service = makeService({.startDelay = 30ms});
-  const auto begin = std::chrono::steady_clock::now();
   std::vector<int> order;
-  std::promise<void> last;
   for (int i = 0; i < 10; ++i) {
-    makeSession(*service)->startConfiguration([&, i](const Backends&) {
-      order.push_back(i);
-      if (i == 9) last.set_value();
-    });
+    makeSession(*service)->startConfiguration([&order, i](const Backends&) { order.push_back(i); });
   }
-  EXPECT_LT(std::chrono::steady_clock::now() - begin, 30ms);  // nobody waited for it
-  last.get_future().get();
-  EXPECT_GE(std::chrono::steady_clock::now() - begin, 30ms);
+  workQueues_.advance(30ms - 1ns);
+  EXPECT_TRUE(order.empty());
+  workQueues_.advance(1ns);
   EXPECT_EQ(order, (std::vector<int>{0, 1, 2, 3, 4, 5, 6, 7, 8, 9}));
 }
 

@@ -6,7 +6,10 @@
 #include <regex>
 #include <set>
 
+#include "host/loop/LinuxWorkQueues.h"
 #include "host/machine/LinuxRandomSource.h"
+#include "testing/ManualWorkQueues.h"
+#include "tests/host/loop/SteadyClock.h"
 #include "tests/recorder/RecorderFixture.h"
 
 namespace tarn::recorder {
@@ -77,7 +80,7 @@ class Gate {
 class RecorderSnareServiceTest : public RecorderFixture {
  protected:
   RecorderSnareService& makeService(std::optional<SnareReason> refuse = {}) {
-    service_ = std::make_unique<RecorderSnareService>(start(), clock_, randomSource_, refuse);
+    service_ = std::make_unique<RecorderSnareService>(start(), clock_, randomSource_, workQueues_, refuse);
     return *service_;
   }
   std::vector<std::string> rows(const std::string& columns) {
@@ -87,6 +90,8 @@ class RecorderSnareServiceTest : public RecorderFixture {
 
   linux_host::LinuxRandomSource randomSource_;
   Replies replies_;
+  tarn::testing::SteadyClock steady_;
+  linux_host::LinuxWorkQueues workQueues_{steady_, nullptr};
   std::unique_ptr<RecorderSnareService> service_;  // goes before the recorder and what it replies to
 };
 
@@ -126,7 +131,7 @@ TEST_F(RecorderSnareServiceTest, LeavesAbsentFieldsOutOfASignature) {
                         {"triggerThresholdValues", values}}));
 }
 
-TEST_F(RecorderSnareServiceTest, RepliesOnAThreadOfItsOwnWithAFreshIdentifier) {
+TEST_F(RecorderSnareServiceTest, RepliesOnAQueueOfItsOwnWithAFreshIdentifier) {
   const auto reporter = makeService().createReporter();
   constexpr std::size_t kRequests = 50;
   for (std::size_t i = 0; i < kRequests; ++i) {
@@ -217,10 +222,13 @@ TEST_F(RecorderSnareServiceTest, AReporterThatOutlivesItTakesAndRecordsNothing) 
   EXPECT_EQ(reporter->makeSignature({"d", "t", "s", "c", {}, {}}).size(), 4U);
 }
 
-TEST_F(RecorderSnareServiceTest, MakesNoThreadForNobody) {
-  makeService().createReporter();
-  service_.reset();
-  EXPECT_TRUE(replies_.all().empty());
+TEST_F(RecorderSnareServiceTest, MakesNoQueueForNobody) {
+  tarn::testing::ManualWorkQueues queues(clock_);
+  RecorderSnareService service(start(), clock_, randomSource_, queues, {});
+  const auto reporter = service.createReporter();
+  EXPECT_TRUE(queues.names().empty());
+  EXPECT_TRUE(reporter->requestSnapshot({}, replies_.handler()));
+  EXPECT_EQ(queues.names().size(), 1U);
 }
 
 TEST_F(RecorderSnareServiceTest, TakesRequestsOfManyThreads) {

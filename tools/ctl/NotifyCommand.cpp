@@ -5,11 +5,10 @@
 #include <optional>
 #include <string>
 
-#include "host/settings/FileNotificationCenter.h"
+#include "host/settings/NotificationFolder.h"
 #include "tools/ctl/Command.h"
 #include "tools/ctl/ExitStatus.h"
 #include "tools/ctl/Output.h"
-#include "tools/ctl/SilentLog.h"
 
 namespace tarn::ctl {
 
@@ -36,9 +35,8 @@ int notify(const Context& context, const Arguments& arguments) {
   if (!isNamed(context.stateDirectory, "--state-dir")) {
     return kWrongUsage;
   }
-  SilentLog log;
-  const linux_host::FileNotificationCenter center(context.stateDirectory + "/notifications", log);
-  const std::string fault = center.write(arguments.name, stateWord(arguments.state));
+  const linux_host::NotificationFolder notifications(context.stateDirectory + "/notifications");
+  const std::string fault = notifications.post(arguments.name, stateWord(arguments.state));
   if (fault.empty()) {
     return kSuccess;
   }

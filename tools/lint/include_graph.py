@@ -17,8 +17,8 @@ WORKERS = ("derived",) + DIAGNOSTICS + TELEMETRY
 # The host's rooms stand on these two.
 GROUND = BASE + ("host/system", "host/log")
 HOST = ("host/system", "host/log", "host/loop", "host/socket", "host/settings", "host/machine", "host/drivers",
-        "host/traces", "host/traces/analysis", "host")
-PROGRAM = SESSION + WORKERS + ("service", "wire", "recorder", "recorder/store") + HOST
+        "host/traces", "host/traces/analysis")
+PROGRAM = SESSION + WORKERS + ("service", "wire", "recorder", "recorder/store") + HOST + ("host",)
 
 # Each folder, from the ground up, and what its files may include beside files of its own. The worker families don't
 # know each other: they meet through the session.
@@ -35,18 +35,19 @@ ROOMS = {
     "session": BASE + ("service/vocabulary",),
     **{folder: SESSION for folder in WORKERS},
     "service": SESSION + WORKERS,
+    "recorder/store": BASE,
+    "recorder": BASE + ("service/vocabulary", "recorder/store"),
     "host/system": BASE,
     "host/log": BASE + ("host/system",),
     "host/loop": GROUND,
     "host/socket": GROUND + ("host/loop", "wire"),
-    "host/settings": GROUND,
+    "host/settings": GROUND + ("host/loop", "host/socket", "recorder"),
     "host/machine": GROUND + ("wire",),
     "host/drivers": GROUND,
     # Loaded by the service and linked to nothing of it: the facility's interface is all that it knows.
     "host/traces/analysis": BASE,
     "host/traces": GROUND + ("host/traces/analysis", "wire"),
-    "recorder/store": BASE,
-    "recorder": BASE + ("service/vocabulary", "recorder/store"),
+    "host": GROUND + HOST + ("recorder",),
     "testing/backends": BASE,
     "testing": BASE + ("service/vocabulary", "testing/backends"),
     "tools/script": PROGRAM,

@@ -1,11 +1,13 @@
-// The worker on the recorder's capture service, whose own thread replies while sessions stop and go. For the
+// The worker on the recorder's capture service, whose own queue replies while sessions stop and go. For the
 // sanitizers.
 #include <random>
 
+#include "host/loop/LinuxWorkQueues.h"
 #include "host/machine/LinuxRandomSource.h"
 #include "recorder/Recorder.h"
 #include "recorder/RecorderSnareService.h"
 #include "tests/diagnostics/snare/SnareFixture.h"
+#include "tests/host/loop/SteadyClock.h"
 #include "tests/recorder/RecorderFixture.h"
 #include "tests/support/Seeds.h"
 
@@ -21,8 +23,8 @@ class SnareReplyStress : public SnareFixture {
     options_.file = directory_.path() / "recorder.sqlite3";
     recorder_ = std::make_unique<recorder::Recorder>(options_, recorderLog_, platform_.clock);
     recorder_->start();
-    service_ =
-        std::make_unique<recorder::RecorderSnareService>(*recorder_, platform_.clock, randomSource_, std::nullopt);
+    service_ = std::make_unique<recorder::RecorderSnareService>(*recorder_, platform_.clock, randomSource_, workQueues_,
+                                                                std::nullopt);
     platform_.facilities().snare = service_.get();
   }
   std::string count(const std::string& name) {
@@ -34,6 +36,8 @@ class SnareReplyStress : public SnareFixture {
   RecordingLog recorderLog_;
   linux_host::LinuxRandomSource randomSource_;
   std::unique_ptr<recorder::Recorder> recorder_;
+  SteadyClock steady_;
+  linux_host::LinuxWorkQueues workQueues_{steady_, nullptr};
   std::unique_ptr<recorder::RecorderSnareService> service_;
 };
 

@@ -28,9 +28,9 @@ TEST(HostConfiguration, EmptyFileHasEveryDefault) {
   EXPECT_FALSE(host.paths.flume);
   EXPECT_FALSE(host.paths.alsa);
   EXPECT_FALSE(host.paths.traceAnalysis);
-  EXPECT_EQ(host.recorder.maximumMegabytes, 256U);
-  EXPECT_EQ(host.recorder.maximumAgeDays, 30U);
-  EXPECT_EQ(host.limits.maximumFrameBytes, 1048576U);
+  EXPECT_EQ(host.recorder.maxMegabytes, 256);
+  EXPECT_EQ(host.recorder.maxAgeDays, 30);
+  EXPECT_EQ(host.limits.maxFrameBytes, 1048576U);
 }
 
 TEST(HostConfiguration, EverySettingIsRead) {
@@ -68,9 +68,9 @@ max_frame_bytes = 65536
   EXPECT_EQ(host.paths.flume, "/run/flume");
   EXPECT_EQ(host.paths.alsa, "/proc/asound");
   EXPECT_EQ(host.paths.traceAnalysis, "/opt/analysis.so");
-  EXPECT_EQ(host.recorder.maximumMegabytes, 1U);
-  EXPECT_EQ(host.recorder.maximumAgeDays, 7U);
-  EXPECT_EQ(host.limits.maximumFrameBytes, 65536U);
+  EXPECT_EQ(host.recorder.maxMegabytes, 1);
+  EXPECT_EQ(host.recorder.maxAgeDays, 7);
+  EXPECT_EQ(host.limits.maxFrameBytes, 65536U);
 }
 
 TEST(HostConfiguration, UnknownKeysAndSectionsAreErrorsWithTheirLine) {
@@ -161,7 +161,7 @@ TEST(HostConfiguration, FileIsReadAndOneThatCannotBeIsNamed) {
   const TemporaryFolder folder;
   folder.write("good.toml", "[recorder]\nmax_age_days = 2\n");
   folder.write("bad.toml", "\nx = 1\n");
-  EXPECT_EQ(readConfiguration(folder.path("good.toml")).configuration->recorder.maximumAgeDays, 2U);
+  EXPECT_EQ(readConfiguration(folder.path("good.toml")).configuration->recorder.maxAgeDays, 2);
   EXPECT_EQ(readConfiguration(folder.path("bad.toml")).error, folder.path("bad.toml") + ":2: unknown key \"x\"");
   EXPECT_EQ(readConfiguration(folder.path("none")).error, folder.path("none") + ": No such file or directory");
   EXPECT_EQ(readConfiguration(folder.path()).error, folder.path() + ": Is a directory");

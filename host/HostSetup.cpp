@@ -1,0 +1,67 @@
+#include "host/HostSetup.h"
+
+#include <utility>
+
+#include "host/log/LogTarget.h"
+#include "host/settings/StateFolder.h"
+
+namespace tarn::linux_host {
+
+namespace {
+
+// The listening socket: the one handed over, else the right to the one named.
+ListenSocket::Result openSocket(const ServiceOptions& options) {
+  ListenSocket::Result handedOver = ListenSocket::takeHandedOver();
+  if (handedOver.socket || !handedOver.error.empty()) {
+    return handedOver;
+  }
+  if (!options.socketPath) {
+    handedOver.error = "no socket: none was handed over, and neither --socket nor XDG_RUNTIME_DIR names one";
+    return handedOver;
+  }
+  if (options.socketIsDefault) {
+    makeFolder(options.socketPath->substr(0, options.socketPath->rfind('/')), 0755);  // binding tells when it failed
+  }
+  return ListenSocket::claim(*options.socketPath);
+}
+
+}  // namespace
+
+std::optional<Refusal> HostSetup::prepare(const ServiceOptions& options) {
+  if (auto refusal = readSettings(options)) {
+    return refusal;
+  }
+  if (std::string error = prepareStateDirectory(options.stateDirectory); !error.empty()) {
+    return Refusal{std::move(error)};
+  }
+  signals = std::make_shared<SignalSource>();
+  ListenSocket::Result opened = openSocket(options);
+  if (!opened.socket) {
+    return Refusal{std::move(opened.error)};
+  }
+  socket = std::move(opened.socket);
+  if (std::string error = holdStateDirectory(options.stateDirectory, stateLock_); !error.empty()) {
+    return Refusal{std::move(error)};
+  }
+  OpenedLog opening = openLog(options.logTarget, options.logLevel, clock);
+  log = std::move(opening.log);
+  return log ? std::nullopt : std::optional<Refusal>(std::in_place, std::move(opening.error));
+}
+
+std::optional<Refusal> HostSetup::readSettings(const ServiceOptions& options) {
+  if (options.configurationFile) {
+    ReadConfiguration read = readConfiguration(*options.configurationFile);
+    if (!read.configuration) {
+      return Refusal{std::move(read.error), kExitConfiguration};
+    }
+    configuration = std::move(*read.configuration);
+  }
+  if (options.devicePropertiesFile) {
+    if (std::string error = deviceProperties.load(*options.devicePropertiesFile); !error.empty()) {
+      return Refusal{std::move(error), kExitConfiguration};
+    }
+  }
+  return std::nullopt;
+}
+
+}  // namespace tarn::linux_host

@@ -1,0 +1,50 @@
+// HostSetup: what the service reads and takes hold of before anything of it runs: its settings, the right to its socket
+// and to its state directory, its log.
+//
+// Owned by the entry point; the platform stands on it. Threads: one, before all others.
+#pragma once
+
+#include <memory>
+#include <optional>
+#include <string>
+
+#include "host/loop/SignalSource.h"
+#include "host/machine/LinuxClock.h"
+#include "host/settings/HostConfiguration.h"
+#include "host/settings/JsonDeviceProperties.h"
+#include "host/settings/ServiceOptions.h"
+#include "host/socket/ListenSocket.h"
+#include "host/system/FileLock.h"
+#include "platform/Log.h"
+
+namespace tarn::linux_host {
+
+// Why the service doesn't run.
+struct Refusal {
+  std::string complaint;  // one line for whoever started it
+  int exitStatus = kExitFailure;
+};
+
+class HostSetup {
+ public:
+  HostSetup() = default;
+  HostSetup(const HostSetup&) = delete;
+  HostSetup& operator=(const HostSetup&) = delete;
+
+  // Called once. What is in the way, if anything; then nothing else may be used.
+  [[nodiscard]] std::optional<Refusal> prepare(const ServiceOptions& options);
+
+  HostConfiguration configuration;
+  JsonDeviceProperties deviceProperties;
+  std::shared_ptr<SignalSource> signals;
+  ListenSocket socket;
+  LinuxClock clock;
+  std::unique_ptr<platform::Log> log;
+
+ private:
+  std::optional<Refusal> readSettings(const ServiceOptions& options);
+
+  FileLock stateLock_;
+};
+
+}  // namespace tarn::linux_host

@@ -1,0 +1,81 @@
+// LateReplies: the replies of a stand-in that come after the call that asked for them: one by one, in the order of the
+// calls, as work of a queue of their own, each once its delay has passed.
+//
+// What waits is bounded: whoever adds is told when there is no room. At the end of the process what is due still comes,
+// as does all work of such queues; when this object ends earlier, what waits comes all the same, unless close() was
+// called.
+//
+// Owned by a stand-in. Threads: any; replies on the queue, which is made by the first reply.
+#pragma once
+
+#include <chrono>
+#include <condition_variable>
+#include <cstddef>
+#include <deque>
+#include <memory>
+#include <mutex>
+#include <string_view>
+#include <utility>
+
+#include "platform/WorkQueue.h"
+
+namespace tarn::recorder {
+
+class LateReplies {
+ public:
+  struct Manner {
+    std::string_view queueName;  // a text that lives for ever
+    std::size_t most = 1024;     // replies that may wait at once
+    std::chrono::nanoseconds delay{0};
+  };
+
+  // The work queues outlive this.
+  LateReplies(platform::WorkQueues& workQueues, const Manner& manner) : workQueues_(workQueues), manner_(manner) {}
+  LateReplies(const LateReplies&) = delete;
+  LateReplies& operator=(const LateReplies&) = delete;
+  ~LateReplies() = default;
+
+  // Whether the reply will come; one that won't, because it is closed or too many wait, is still the caller's.
+  [[nodiscard]] bool add(platform::Work&& reply) {
+    return add(std::move(reply), [] {});
+  }
+  // The same; `taken` is called when the reply will come, and before it comes.
+  template <class Action>
+  [[nodiscard]] bool add(platform::Work&& reply, Action taken) {
+    const std::lock_guard lock(line_->mutex);
+    if (line_->closed || line_->waiting.size() >= manner_.most) return false;
+    taken();
+    enqueue(std::move(reply));
+    return true;
+  }
+  // Calls `action` unless it is closed; close() waits for that.
+  template <class Action>
+  void ifOpen(Action action) {
+    const std::lock_guard lock(line_->mutex);
+    if (!line_->closed) action();
+  }
+  // Takes no more, destroys what waits and waits for the reply that is under way. Not to be called by a reply.
+  void close();
+
+ private:
+  // Shared with the work on the queue.
+  struct Line {
+    void answerNext();
+
+    std::mutex mutex;
+    std::condition_variable answered;
+    // Guarded by mutex.
+    std::deque<platform::Work> waiting;
+    bool answering = false;
+    bool closed = false;
+  };
+
+  void enqueue(platform::Work reply);
+
+  platform::WorkQueues& workQueues_;
+  const Manner manner_;
+  const std::shared_ptr<Line> line_ = std::make_shared<Line>();
+  std::shared_ptr<platform::WorkQueue> queue_;  // guarded by the line's mutex
+};
+
+}  // namespace tarn::recorder

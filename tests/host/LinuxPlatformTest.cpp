@@ -1,0 +1,265 @@
+// What holds between the machine's facilities: pauses, status, and the order of the end.
+#include "host/LinuxPlatform.h"
+
+#include <gtest/gtest.h>
+
+#include <filesystem>
+#include <functional>
+#include <future>
+#include <thread>
+
+#include "host/machine/LinuxClock.h"
+#include "platform/TarnReportingServiceProtocol.h"
+#include "testing/RecordingLog.h"
+#include "tests/host/Eventually.h"
+#include "tests/host/InChild.h"
+#include "tests/host/TemporaryFolder.h"
+#include "tests/host/socket/RecordingService.h"
+#include "tests/host/socket/TestClient.h"
+#include "tests/recorder/RecorderFixture.h"
+
+namespace tarn::linux_host {
+namespace {
+
+using namespace std::chrono_literals;
+using testing::eventually;
+using testing::messageRequest;
+using testing::TestClient;
+
+// A service manager that notes what it is told.
+class NotedManager final : public ServiceManager {
+ public:
+  void notifyReady() override { ready = true; }
+  void notifyStopping() override {
+    if (onStopping) onStopping();
+  }
+  std::optional<std::chrono::microseconds> watchdogInterval() const override { return std::nullopt; }
+
+  bool ready = false;
+  std::function<void()> onStopping;
+};
+
+class LinuxPlatformTest : public ::testing::Test {
+ protected:
+  ~LinuxPlatformTest() override { stop(); }
+
+  // The configuration is set by tests before this.
+  LinuxPlatform& make() {
+    platform_.emplace(configuration_, folder_.path(), JsonDeviceProperties(),
+                      LinuxPlatform::Ground{clock_, log_, manager_});
+    service_ = std::make_shared<testing::RecordingService>(platform_->loop().queue());
+    return *platform_;
+  }
+  std::string listen() {
+    return platform_->listen(ListenSocket::claim(socket()).socket, service_, [] { return std::size_t{3}; });
+  }
+  void serve() {
+    serving_ = std::thread([this] { platform_->serve(); });
+  }
+  void stop() {
+    if (serving_.joinable()) {
+      platform_->loop().stop();
+      serving_.join();
+    }
+  }
+  void startAndServe() {
+    make();
+    ASSERT_EQ(platform_->start(), "");
+    ASSERT_EQ(listen(), "");
+    serve();
+  }
+  // Serves nothing but the end.
+  void end() {
+    platform_->loop().stop();
+    platform_->serve();
+  }
+  void record(std::string_view event) { platform_->facilities().wattlog->logRegisteredEvent(1, event, {}); }
+  // A queue of a worker's own, with one piece of work that lasts until it is let go.
+  std::shared_ptr<platform::WorkQueue> heldQueue() {
+    auto queue = platform_->facilities().workQueues.makeSerialQueue("own", platform::QualityOfService::Utility);
+    queue->async([this] { letGo_.get_future().wait(); });
+    return queue;
+  }
+  std::string socket() const { return folder_.path("socket"); }
+  std::vector<std::string> recorded() const {
+    return recorder::ask(folder_.path("recorder.sqlite3"), "SELECT backend || ' ' || name FROM events ORDER BY id");
+  }
+  // Whether a message is held up while others are answered, and whether it goes on after `makeRoom`.
+  void expectPauseUntil(const std::function<void()>& makeRoom) {
+    TestClient other(socket());
+    TestClient client(socket());
+    ASSERT_TRUE(client.request(1, messageRequest({{"a", 1}})));
+    std::int64_t asked = 0;
+    ASSERT_TRUE(eventually([&] {
+      const auto status = other.status();
+      return status && status->get("frames_received").asInt64() > ++asked;
+    }));
+    EXPECT_EQ(other.status()->get("messages_received").asInt64(), 0);
+    EXPECT_FALSE(client.readable(0));
+    makeRoom();
+    EXPECT_TRUE(client.reply());
+    EXPECT_EQ(other.status()->get("messages_received").asInt64(), 1);
+  }
+
+  TemporaryFolder folder_;
+  testing::RecordingLog log_;
+  LinuxClock clock_;
+  NotedManager manager_;
+  HostConfiguration configuration_;
+  std::promise<void> letGo_;
+  std::optional<LinuxPlatform> platform_;
+  std::shared_ptr<testing::RecordingService> service_;
+  std::thread serving_;
+};
+
+TEST_F(LinuxPlatformTest, RequestsWaitWhileTheRecorderIsFull) {
+  configuration_.recorder.highWaterEvents = 1;
+  configuration_.recorder.lowWaterEvents = 0;
+  make();
+  record("event");  // stays, as nothing writes before the start
+  ASSERT_EQ(listen(), "");
+  serve();
+  expectPauseUntil([this] { platform_->loop().queue()->async([this] { EXPECT_EQ(platform_->start(), ""); }); });
+}
+
+TEST_F(LinuxPlatformTest, RequestsWaitWhileTheWorkersQueuesAreFull) {
+  configuration_.limits.poolWork = {.high = 1, .low = 0};
+  startAndServe();
+  const auto queue = heldQueue();
+  expectPauseUntil([this] { letGo_.set_value(); });
+}
+
+TEST_F(LinuxPlatformTest, StatusTellsSessionsQueuedWorkAndTheRecordersCounters) {
+  configuration_.recorder.groupTime = configuration_.recorder.quietTime = 1h;
+  startAndServe();
+  const auto queue = heldQueue();
+  queue->async([] {});
+  record("one");
+  record("two");
+  const auto status = TestClient(socket()).status();
+  ASSERT_TRUE(status);
+  EXPECT_EQ(status->get("sessions"), plist::ValueView(3));
+  EXPECT_EQ(status->get("queued"), plist::ValueView(2));
+  EXPECT_EQ(status->get("recorder_handed_over"), plist::ValueView(2));
+  EXPECT_EQ(status->get("recorder_waiting"), plist::ValueView(2));
+  EXPECT_EQ(status->get("recorder_committed"), plist::ValueView(0));
+  EXPECT_EQ(status->get("recorder_expired"), plist::ValueView(0));
+  EXPECT_EQ(status->get("recorder_failed"), plist::ValueView(0));
+  EXPECT_EQ(status->get("connections_open"), plist::ValueView(1));
+  letGo_.set_value();
+}
+
+TEST_F(LinuxPlatformTest, ListeningTellsTheManagerThatTheServiceIsReady) {
+  make();
+  ASSERT_EQ(platform_->start(), "");
+  EXPECT_FALSE(manager_.ready);
+  ASSERT_EQ(listen(), "");
+  EXPECT_TRUE(manager_.ready);
+  end();
+}
+
+TEST_F(LinuxPlatformTest, FailedListenCommitsWhatTheRecorderHoldsAndIsTold) {
+  make();
+  ASSERT_EQ(platform_->start(), "");
+  record("event");
+  std::filesystem::create_directory(folder_.path("gone"));
+  ListenSocket socket = ListenSocket::claim(folder_.path("gone/socket")).socket;
+  std::filesystem::remove_all(folder_.path("gone"));
+  EXPECT_NE(platform_->listen(std::move(socket), service_, [] { return std::size_t{0}; }), "");
+  EXPECT_FALSE(manager_.ready);
+  EXPECT_EQ(recorded(), (std::vector<std::string>{"wattlog event"}));
+}
+
+// The manager is told, then nobody can connect any more, then the queues' work reaches the recorder, then it commits.
+TEST_F(LinuxPlatformTest, EndClosesTheListenerThenSettlesTheQueuesThenCommits) {
+  configuration_.limits.settleTime = 20s;
+  make();
+  ASSERT_EQ(platform_->start(), "");
+  ASSERT_EQ(listen(), "");
+  bool listenedWhenToldToStop = false;
+  manager_.onStopping = [&] { listenedWhenToldToStop = std::filesystem::exists(socket()); };
+  const auto queue = platform_->facilities().workQueues.makeSerialQueue("own", platform::QualityOfService::Utility);
+  queue->async([this] {
+    EXPECT_TRUE(eventually([this] { return !std::filesystem::exists(socket()); }));
+    record("last");
+  });
+  end();
+  EXPECT_TRUE(listenedWhenToldToStop);
+  EXPECT_EQ(recorded(), (std::vector<std::string>{"wattlog last"}));
+}
+
+TEST_F(LinuxPlatformTest, EndServesTheRequestsThatWereTaken) {
+  make();
+  ASSERT_EQ(platform_->start(), "");
+  ASSERT_EQ(listen(), "");
+  platform_->loop().queue()->async([this] { record("taken"); });
+  end();
+  EXPECT_EQ(recorded(), (std::vector<std::string>{"wattlog taken"}));
+}
+
+TEST_F(LinuxPlatformTest, EndWaitsForQueuesThatGetShorter) {
+  configuration_.limits.settleTime = 500ms;
+  make();
+  ASSERT_EQ(platform_->start(), "");
+  ASSERT_EQ(listen(), "");
+  const auto queue = platform_->facilities().workQueues.makeSerialQueue("own", platform::QualityOfService::Utility);
+  for (int piece = 0; piece < 4; ++piece) {
+    queue->async([this] {
+      std::this_thread::sleep_for(200ms);
+      record("piece");
+    });
+  }
+  end();
+  EXPECT_EQ(recorded().size(), 4U);
+  EXPECT_FALSE(log_.contains("left undone"));
+}
+
+TEST_F(LinuxPlatformTest, WorkThatABackEndKeepsWaitingIsLeftUndoneAndTold) {
+  configuration_.limits.settleTime = 10ms;
+  make();
+  ASSERT_EQ(platform_->start(), "");
+  ASSERT_EQ(listen(), "");
+  const auto queue =
+      platform_->facilities().workQueues.makeSuspendableQueue("own", platform::QualityOfService::Utility);
+  queue->async([&queue] { queue->suspend(1h, [] { ADD_FAILURE(); }); });
+  queue->async([] { ADD_FAILURE(); });
+  record("event");
+  end();
+  EXPECT_TRUE(log_.contains(platform::LogLevel::Default, "2 pieces of work of the workers' queues are left undone"));
+  EXPECT_EQ(recorded(), (std::vector<std::string>{"wattlog event"}));
+}
+
+TEST_F(LinuxPlatformTest, ExitOfTheProcessMakesSafeWhatWasTaken) {
+  const int status = testing::inChild([this] {
+    make();
+    if (!platform_->start().empty() || !listen().empty()) return 1;
+    record("event");
+    platform_->loop().queue()->async([this] { platform_->facilities().processControl.exitProcess(2); });
+    platform_->serve();
+    return 1;
+  });
+  EXPECT_EQ(status, 2);
+  EXPECT_EQ(recorded(), (std::vector<std::string>{"wattlog event"}));
+  EXPECT_FALSE(std::filesystem::exists(socket()));
+}
+
+TEST_F(LinuxPlatformTest, HandsOutEverythingThatAMachineHasOnTheConfiguredPaths) {
+  configuration_.paths.diagnosticLogs = "/elsewhere";
+  make();
+  const platform::Facilities& facilities = platform_->facilities();
+  EXPECT_EQ(facilities.fileSystem.wellKnownDirectory(platform::WellKnownDirectory::DiagnosticLogs),
+            "/elsewhere/DiagnosticLogs");
+  EXPECT_EQ(facilities.fileSystem.wellKnownDirectory(platform::WellKnownDirectory::Temporary), folder_.path("tmp"));
+  EXPECT_TRUE(facilities.wattlog && facilities.pylon && facilities.snare && facilities.tattle && facilities.gyre);
+  EXPECT_TRUE(facilities.flume && facilities.rtcReporting && facilities.performanceTrace);
+  EXPECT_TRUE(facilities.traceAnalysis && facilities.perfDataWriters && facilities.signposts);
+  EXPECT_FALSE(facilities.accessories);
+}
+
+TEST_F(LinuxPlatformTest, TemporaryFolderThatCannotBeMadeFailsTheStart) {
+  folder_.write("tmp", "in the way");
+  EXPECT_EQ(make().start(), folder_.path("tmp") + ": Not a directory");
+}
+
+}  // namespace
+}  // namespace tarn::linux_host
