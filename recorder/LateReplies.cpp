@@ -4,14 +4,14 @@ namespace tarn::recorder {
 
 void LateReplies::close() {
   std::deque<platform::Work> dropped;  // destroyed after the lock: each may hold the last of something
-  std::unique_lock lock(line_->mutex);
+  const platform::MutexLock lock(line_->mutex);
   line_->closed = true;
   dropped.swap(line_->waiting);
-  line_->answered.wait(lock, [this] { return !line_->answering; });
-  lock.unlock();
+  while (line_->answering) {
+    line_->answered.wait(line_->mutex);
+  }
 }
 
-// Called under the lock.
 void LateReplies::enqueue(platform::Work reply) {
   if (!queue_) queue_ = workQueues_.makeSerialQueue(manner_.queueName, platform::QualityOfService::Utility);
   line_->waiting.push_back(std::move(reply));
@@ -25,17 +25,19 @@ void LateReplies::enqueue(platform::Work reply) {
 
 // All are equally late, so the first that waits is the one whose turn it is.
 void LateReplies::Line::answerNext() {
-  std::unique_lock lock(mutex);
-  if (waiting.empty()) return;
-  platform::Work reply = std::move(waiting.front());
-  waiting.pop_front();
-  answering = true;
-  lock.unlock();
+  platform::Work reply;
+  {
+    const platform::MutexLock lock(mutex);
+    if (waiting.empty()) return;
+    reply = std::move(waiting.front());
+    waiting.pop_front();
+    answering = true;
+  }
   reply();
   reply.reset();
-  lock.lock();
+  const platform::MutexLock lock(mutex);
   answering = false;
-  answered.notify_all();
+  answered.notifyAll();
 }
 
 }  // namespace tarn::recorder

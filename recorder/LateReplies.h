@@ -9,14 +9,13 @@
 #pragma once
 
 #include <chrono>
-#include <condition_variable>
 #include <cstddef>
 #include <deque>
 #include <memory>
-#include <mutex>
 #include <string_view>
 #include <utility>
 
+#include "platform/ThreadSafety.h"
 #include "platform/WorkQueue.h"
 
 namespace tarn::recorder {
@@ -42,7 +41,7 @@ class LateReplies {
   // The same; `taken` is called when the reply will come, and before it comes.
   template <class Action>
   [[nodiscard]] bool add(platform::Work&& reply, Action taken) {
-    const std::lock_guard lock(line_->mutex);
+    const platform::MutexLock lock(line_->mutex);
     if (line_->closed || line_->waiting.size() >= manner_.most) return false;
     taken();
     enqueue(std::move(reply));
@@ -51,7 +50,7 @@ class LateReplies {
   // Calls `action` unless it is closed; close() waits for that.
   template <class Action>
   void ifOpen(Action action) {
-    const std::lock_guard lock(line_->mutex);
+    const platform::MutexLock lock(line_->mutex);
     if (!line_->closed) action();
   }
   // Takes no more, destroys what waits and waits for the reply that is under way. Not to be called by a reply.
@@ -62,20 +61,19 @@ class LateReplies {
   struct Line {
     void answerNext();
 
-    std::mutex mutex;
-    std::condition_variable answered;
-    // Guarded by mutex.
-    std::deque<platform::Work> waiting;
-    bool answering = false;
-    bool closed = false;
+    platform::Mutex mutex;
+    platform::ConditionVariable answered;
+    std::deque<platform::Work> waiting TARN_GUARDED_BY(mutex);
+    bool answering TARN_GUARDED_BY(mutex) = false;
+    bool closed TARN_GUARDED_BY(mutex) = false;
   };
 
-  void enqueue(platform::Work reply);
+  void enqueue(platform::Work reply) TARN_REQUIRES(line_->mutex);
 
   platform::WorkQueues& workQueues_;
   const Manner manner_;
   const std::shared_ptr<Line> line_ = std::make_shared<Line>();
-  std::shared_ptr<platform::WorkQueue> queue_;  // guarded by the line's mutex
+  std::shared_ptr<platform::WorkQueue> queue_ TARN_GUARDED_BY(line_->mutex);
 };
 
 }  // namespace tarn::recorder
