@@ -1,5 +1,6 @@
 // The intake of TarnReportingSession: what happens to a message before any worker sees it, and to whom it goes.
 #include <array>
+#include <cassert>
 #include <mutex>
 #include <unordered_map>
 
@@ -37,7 +38,7 @@ std::string withoutBlanks(std::string_view key) {
 }  // namespace
 
 void TarnReportingSession::sendMessage(const MessagePointer& message, platform::Reply<> reply) {
-  TarnReportingRequireServerQueue();
+  assert(TarnReportingIsOnServerQueue());
   const TarnReportingSignpost signpost(SignpostCategory::Message, kModule, "sendMessage", {"reporterID", reporterID_});
   ++totalMessageCount_;
   addMissingDates(*message);

@@ -8,8 +8,12 @@
 
 namespace tarn {
 
+bool TarnReportingIsOnServerQueue() noexcept {
+  return TarnReportingUtilityGetReportingServerQueue()->isCurrent();
+}
+
 void TarnReportingRequireServerQueue() noexcept {
-  if (!TarnReportingUtilityGetReportingServerQueue()->isCurrent()) [[unlikely]] {
+  if (!TarnReportingIsOnServerQueue()) [[unlikely]] {
     static_cast<void>(std::fputs("tarnkit: code of the server queue was called outside it\n", stderr));
     std::abort();
   }

@@ -138,8 +138,9 @@ TEST_F(MemoryLogWorker, TheToolsRunOnQueuesOfTheirOwnAndBothBeforeTheWaitEnds) {
   });
   request(*startedSession());
   EXPECT_EQ(waiting, 2U);
-  EXPECT_EQ(platform_.workQueues.names(), (Strings{"sys.oxbow.tarnkit.reporting.memorylog.zones",
-                                                   "sys.oxbow.tarnkit.reporting.memorylog.resources"}));
+  EXPECT_EQ(platform_.workQueues.names(),
+            (Strings{"sys.oxbow.tarnkit.reporting.server", "sys.oxbow.tarnkit.reporting.memorylog.zones",
+                     "sys.oxbow.tarnkit.reporting.memorylog.resources"}));
 }
 
 TEST_F(MemoryLogWorker, LogsTheZonesFirstEachToolsBlocksCountedFromOne) {
