@@ -221,7 +221,7 @@ TEST_F(LinuxPlatformTest, WorkThatABackEndKeepsWaitingIsLeftUndoneAndTold) {
   ASSERT_EQ(listen(), "");
   const auto queue =
       platform_->facilities().workQueues.makeSuspendableQueue("own", platform::QualityOfService::Utility);
-  queue->async([&queue] { queue->suspend(1h, [] { ADD_FAILURE(); }); });
+  queue->async([queue] { queue->suspend(1h, [] { ADD_FAILURE(); }); });
   queue->async([] { ADD_FAILURE(); });
   record("event");
   end();
