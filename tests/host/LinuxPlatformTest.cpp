@@ -202,15 +202,15 @@ TEST_F(LinuxPlatformTest, EndWaitsForQueuesThatGetShorter) {
   make();
   ASSERT_EQ(platform_->start(), "");
   ASSERT_EQ(listen(), "");
-  const auto queue = platform_->facilities().workQueues.makeSerialQueue("own", platform::QualityOfService::Utility);
-  for (int piece = 0; piece < 4; ++piece) {
+  for (std::size_t piece = 0; piece < 3 * LinuxWorkQueues::kThreads; ++piece) {
+    const auto queue = platform_->facilities().workQueues.makeSerialQueue("own", platform::QualityOfService::Utility);
     queue->async([this] {
       std::this_thread::sleep_for(200ms);
       record("piece");
     });
   }
   end();
-  EXPECT_EQ(recorded().size(), 4U);
+  EXPECT_EQ(recorded().size(), 3 * LinuxWorkQueues::kThreads);
   EXPECT_FALSE(log_.contains("left undone"));
 }
 
@@ -221,7 +221,7 @@ TEST_F(LinuxPlatformTest, WorkThatABackEndKeepsWaitingIsLeftUndoneAndTold) {
   ASSERT_EQ(listen(), "");
   const auto queue =
       platform_->facilities().workQueues.makeSuspendableQueue("own", platform::QualityOfService::Utility);
-  queue->async([&queue] { queue->suspend(1h, [] { ADD_FAILURE(); }); });
+  queue->async([queue] { queue->suspend(1h, [] { ADD_FAILURE(); }); });
   queue->async([] { ADD_FAILURE(); });
   record("event");
   end();

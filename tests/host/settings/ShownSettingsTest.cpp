@@ -58,8 +58,10 @@ Texts shownInTheExample() {
 Texts shownInTheDocument() {
   Texts shown;
   const std::string document = textOf("docs/operations.md");
-  for (const std::smatch& row : matches(document, "\\| `(\\[\\w+\\] \\w+)` \\| `?([^|`]*)`? \\|")) {
-    shown[row.str(1)] = row.str(2);
+  for (const std::smatch& row : matches(document, "\\| `(\\[\\w+\\] \\w+)` \\| ([^|]*) \\|")) {
+    std::string value = row.str(2);
+    std::erase(value, '`');
+    shown[row.str(1)] = value;
   }
   return shown;
 }
