@@ -17,12 +17,10 @@ REAL_TIME = ("tests/e2e/*", "tests/scenario/*", "tests/host/*", "tests/recorder/
 # A fatal check on our own mistakes, where there is no log yet or no longer.
 LAST_WORDS = ("service/vocabulary/ProcessState.cpp", "service/vocabulary/TarnReportingServerQueue.cpp",
               "client/OwnerCheck.cpp", "testing/*")
-# Locks that clang doesn't check: those of values, of the worker families and of three adapters, told in words; one that
-# guards nothing of its own; and the service's, which its own queue needs for changes alone.
+# Locks that clang doesn't check: those of values and of the worker families, told in words; one that guards nothing of
+# its own; and the service's, which its own queue needs for changes alone.
 UNCHECKED_LOCKS = ("platform/ThreadSafety.h", "plist/*", "derived/*", "diagnostics/*", "telemetry/*", "testing/*",
-                   "tools/*", *TRIALS, "host/loop/LinuxConditions.cpp", "service/TarnReportingService.h",
-                   "host/settings/FileNotificationCenter.h", "recorder/RecorderSnareService.cpp",
-                   "recorder/RecorderRtcReportingService.cpp")
+                   "tools/*", *TRIALS, "host/loop/LinuxConditions.cpp", "service/TarnReportingService.h")
 NOWHERE = ()
 
 
