@@ -127,7 +127,6 @@ bool ReplyPass::readContainer(const CborHead& head, plist::Value& value) {
 }  // namespace
 
 bool ReplyDecoder::decode(std::span<const std::byte> frame, DecodedReply& reply, std::string& reason) {
-  reply.id = 0;
   reply.error.reset();
   reply.results.clear();
   ReplyPass pass(frame, reply, builder_, keyLists_);

@@ -54,6 +54,10 @@ TEST(Encoder, DatesAreIntegersWhenTheyHaveNoFraction) {
   EXPECT_EQ(hexOf(plist::Date{1363896240.5}), "c1fb41d452d9ec200000");
   EXPECT_EQ(hexOf(plist::Date{-1.0}), "c120");
   EXPECT_EQ(hexOf(plist::Date{-0.0}), "c1fb8000000000000000");
+  EXPECT_EQ(hexOf(plist::Date{0x1p53}), "c11b0020000000000000");
+  EXPECT_EQ(hexOf(plist::Date{-0x1p53}), "c13b001fffffffffffff");
+  EXPECT_EQ(hexOf(plist::Date{0x1p54}), "c1fb4350000000000000");
+  EXPECT_EQ(hexOf(plist::Date{-0x1p54}), "c1fbc350000000000000");
   EXPECT_EQ(hexOf(plist::Date{1e300}), "c1fb7e37e43c8800759c");
   EXPECT_EQ(hexOf(plist::Date{std::numeric_limits<double>::infinity()}), "c1fb7ff0000000000000");
 }

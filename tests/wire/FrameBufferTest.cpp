@@ -106,6 +106,7 @@ TEST(FrameBuffer, AnAnnouncedFrameThatNeverComesCostsNoMemory) {
   feed(buffer, testing::fromHex("00000040"));
   std::span<const std::byte> frame;
   ASSERT_EQ(buffer.next(frame), FrameBuffer::Next::Incomplete);
+  EXPECT_EQ(buffer.announcedBytes(), std::size_t{1} << 30U);
   EXPECT_FALSE(buffer.space().empty());
   EXPECT_LT(heap.bytes(), kGulp + kSlack);
 }
@@ -127,6 +128,90 @@ TEST(FrameBuffer, MemoryStaysWithinTheLargestFrameAndAGulpAndShrinksBack) {
   EXPECT_EQ(frames, (std::vector<std::size_t>{kDefaultMaxFrameBytes, 4}));
   buffer.space();
   EXPECT_LT(heap.bytes(), kGulp + kSlack);
+}
+
+TEST(FrameBuffer, HoldsNoMemoryAndKnowsNoLengthBeforeBytesCome) {
+  FrameBuffer buffer;
+  EXPECT_EQ(buffer.capacityBytes(), 0U);
+  feed(buffer, testing::fromHex("020100"));
+  EXPECT_EQ(buffer.announcedBytes(), 0U);
+}
+
+constexpr std::size_t kHalf = FrameBuffer::kGulpBytes / 2;
+
+// Feeds a frame and so much of the next that `bytes` are received, and takes the first.
+void feedAFrameAndAPart(FrameBuffer& buffer, std::size_t bytes) {
+  const std::string stream = framed("first") + framed(std::string(bytes, 'x'));
+  ASSERT_EQ(feed(buffer, std::string_view(stream).substr(0, bytes)), bytes);
+  ASSERT_EQ(takeAll(buffer), std::vector<std::string>{"first"});
+}
+
+TEST(FrameBuffer, PendingBytesStayInPlaceWhileHalfAGulpIsFree) {
+  for (const std::size_t bytes : {std::size_t{20}, kHalf}) {
+    FrameBuffer buffer;
+    feedAFrameAndAPart(buffer, bytes);
+    EXPECT_EQ(buffer.space().size(), FrameBuffer::kGulpBytes - bytes);
+  }
+}
+
+TEST(FrameBuffer, PendingBytesMoveToTheFrontWhenLessThanHalfAGulpIsFree) {
+  FrameBuffer buffer;
+  feedAFrameAndAPart(buffer, kHalf + 1);
+  const std::size_t pending = buffer.pendingBytes();
+  EXPECT_EQ(buffer.space().size(), FrameBuffer::kGulpBytes - pending);
+  EXPECT_EQ(buffer.pendingBytes(), pending);
+}
+
+TEST(FrameBuffer, SpaceIsWholeAgainOnceEverythingIsTaken) {
+  FrameBuffer buffer;
+  feed(buffer, framed("whole"));
+  takeAll(buffer);
+  EXPECT_EQ(buffer.space().size(), FrameBuffer::kGulpBytes);
+}
+
+TEST(FrameBuffer, GrowsWhenMoreThanHalfAGulpIsPending) {
+  const std::string stream = framed(std::string(100000, 'x'));
+  for (const std::size_t bytes : {kHalf, kHalf + 1}) {
+    FrameBuffer buffer;
+    feed(buffer, std::string_view(stream).substr(0, bytes));
+    takeAll(buffer);
+    buffer.space();
+    EXPECT_EQ(buffer.capacityBytes(), (bytes > kHalf ? 2 : 1) * FrameBuffer::kGulpBytes);
+  }
+}
+
+// Feeds the whole stream, taking frames on the way; the memory that was held when the last byte came.
+std::size_t feedAll(FrameBuffer& buffer, std::string_view stream, std::vector<std::string>& frames) {
+  std::size_t capacity = 0;
+  for (std::size_t at = 0; at < stream.size();) {
+    at += feed(buffer, stream.substr(at));
+    capacity = buffer.capacityBytes();
+    for (std::string& frame : takeAll(buffer)) frames.push_back(std::move(frame));
+  }
+  return capacity;
+}
+
+TEST(FrameBuffer, TwiceTheMemoryIsKeptAndFourTimesIsGivenBack) {
+  std::vector<std::string> frames;
+  FrameBuffer buffer;
+  EXPECT_EQ(feedAll(buffer, framed(std::string(80000, 'x')), frames), 2 * FrameBuffer::kGulpBytes);
+  buffer.space();
+  EXPECT_EQ(buffer.capacityBytes(), 2 * FrameBuffer::kGulpBytes);
+  EXPECT_EQ(feedAll(buffer, framed(std::string(200000, 'x')), frames), 4 * FrameBuffer::kGulpBytes);
+  buffer.space();
+  EXPECT_EQ(buffer.capacityBytes(), FrameBuffer::kGulpBytes);
+}
+
+TEST(FrameBuffer, ASinglePendingByteSurvivesTheShrinking) {
+  std::vector<std::string> frames;
+  FrameBuffer buffer;
+  const std::string next = framed("next!");
+  feedAll(buffer, framed(std::string(200000, 'x')) + next[0], frames);
+  ASSERT_EQ(buffer.pendingBytes(), 1U);
+  buffer.space();
+  ASSERT_EQ(buffer.capacityBytes(), FrameBuffer::kGulpBytes);
+  feed(buffer, std::string_view(next).substr(1));
+  EXPECT_EQ(takeAll(buffer), std::vector<std::string>{"next!"});
 }
 
 TEST(FrameBuffer, ReleaseGivesMemoryBackOnlyWhenNothingIsPending) {

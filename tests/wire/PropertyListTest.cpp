@@ -47,6 +47,7 @@ TEST(PropertyList, TakesEveryKindOfValue) {
 TEST(PropertyList, IntegersReachFromMinusTwoToThe63ToTwoToThe64LessOne) {
   EXPECT_EQ(valueOf("3b7fffffffffffffff").view().signedValue(), std::numeric_limits<std::int64_t>::min());
   EXPECT_EQ(valueOf("1b7fffffffffffffff").view().signedValue(), std::numeric_limits<std::int64_t>::max());
+  EXPECT_EQ(valueOf("1b7fffffffffffffff").kind(), plist::Kind::Signed);
   EXPECT_EQ(valueOf("1b8000000000000000").kind(), plist::Kind::Unsigned);
   EXPECT_EQ(valueOf("1bffffffffffffffff").view().unsignedValue(), std::numeric_limits<std::uint64_t>::max());
 }

@@ -59,12 +59,35 @@ TEST(ReplyDecoder, RefusesWhatIsNoReplyAndSaysWhy) {
       {"8107", "not a reply array"},
       {"9f07f6ff", "not a reply array"},
       {"8220f6", "not a reply array"},
+      {"a207f6", "not a reply array"},
+      {"6207f6", "not a reply array"},
+      {"82", "not a reply array"},
       {"8207f5", "an error that is neither null nor [domain, code, text]"},
       {"82078261610"
        "1",
        "an error that is neither null nor [domain, code, text]"},
       {"820783616101f6", "an error that is neither null nor [domain, code, text]"},
       {"820783616161610161", "an error that is neither null nor [domain, code, text]"},
+      {"8207a3616101"
+       "6162",
+       "an error that is neither null nor [domain, code, text]"},
+      {"820784616101"
+       "616200",
+       "an error that is neither null nor [domain, code, text]"},
+      {"820783"
+       "01016162",
+       "an error that is neither null nor [domain, code, text]"},
+      {"820783"
+       "616161616162",
+       "an error that is neither null nor [domain, code, text]"},
+      {"82078361611b8000000000000000"
+       "6162",
+       "an error that is neither null nor [domain, code, text]"},
+      {"820783"
+       "61618001",
+       "an error that is neither null nor [domain, code, text]"},
+      {"8307f6c1", "a result that is no property-list value"},
+      {"8307f6c11c", "a result that is no property-list value"},
       {"8307f6", "a result that is no property-list value"},
       {"8307f6f6", "a result that is no property-list value"},
       {"8307f6a26161016161"
@@ -99,6 +122,35 @@ TEST(ReplyDecoder, AnUnreadableReplyLeavesNothingForTheNext) {
   EXPECT_EQ(reply.id, 8U);
   ASSERT_EQ(reply.results.size(), 1U);
   EXPECT_EQ(reply.results[0], plist::Value(plist::Array{1}));
+}
+
+TEST(ReplyDecoder, NothingOfAnEarlierReplyRemains) {
+  ReplyDecoder decoder;
+  DecodedReply reply;
+  std::string reason;
+  ASSERT_TRUE(decoder.decode(asBytes(fromHex("8307"
+                                             "83616101616205")),
+                             reply, reason));
+  ASSERT_TRUE(decoder.decode(asBytes(fromHex("8208f6")), reply, reason));
+  EXPECT_EQ(reply.id, 8U);
+  EXPECT_FALSE(reply.error.has_value());
+  EXPECT_TRUE(reply.results.empty());
+}
+
+TEST(ReplyDecoder, WhatWasNotDecodedHasNoNumberAndNoCode) {
+  EXPECT_EQ(DecodedReply{}.id, 0U);
+  EXPECT_EQ(ReplyError{}.code, 0);
+}
+
+TEST(ReplyDecoder, ResultsNestAsDeepAsArgumentsAndNoDeeper) {
+  std::string maps;
+  for (std::size_t i = 0; i + 1 < kMaxNesting; ++i) maps += "a1616b";
+  std::string arrays;
+  for (std::size_t i = 0; i + 1 < kMaxNesting; ++i) arrays += "81";
+  EXPECT_TRUE(decode("8307f6" + arrays + "80").good);
+  EXPECT_FALSE(decode("8307f6" + arrays + "8180").good);
+  EXPECT_TRUE(decode("8307f6" + maps + "a0").good);
+  EXPECT_FALSE(decode("8307f6" + maps + "a1616ba0").good);
 }
 
 }  // namespace

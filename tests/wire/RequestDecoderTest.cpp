@@ -188,7 +188,28 @@ TEST(RequestDecoder, BadUTF8OutsideADictionaryIsAWrongKindOnly) {
   EXPECT_EQ(decodeHex("83070161ff").code(), 2);
 }
 
+TEST(RequestDecoder, RefusalsSayWhatWasExpected) {
+  const std::pair<const char*, const char*> frames[] = {
+      {"8107", "an operation is missing"},
+      {"8307016131", "createReportingSession: reporter ID: a signed 64-bit integer expected"},
+      {"840702613101", "setServiceType: type: 0 to 65535 expected"},
+      {"840704f601", "setConfiguration: a dictionary expected"},
+      {"860706a061310080", "sendMessage: category: 0 to 4294967295 expected"},
+      {"860706a000613180", "sendMessage: type: 0 to 65535 expected"},
+      {"860706a00000a0", "sendMessage: reporter IDs: an array of signed 64-bit integers or null expected"},
+      {"860706a0000081f6", "sendMessage: reporter IDs: an array of signed 64-bit integers or null expected"}};
+  for (const auto& [hex, text] : frames) {
+    EXPECT_EQ(decodeHex(hex).refusal.text, text) << hex;
+  }
+}
+
 // Closing the connection.
+
+TEST(RequestDecoder, AFrameThatIsNoArrayIsCalledSo) {
+  for (const char* hex : {"00", "a0", "6161"}) {
+    EXPECT_EQ(decodeHex(hex).refusal.text, "not a CBOR array") << hex;
+  }
+}
 
 TEST(RequestDecoder, FramesThatAreNoArrayAreUnreadable) {
   for (const char* hex : {"", "00", "a0", "6161", "f6", "c18107",

@@ -216,6 +216,26 @@ TEST(WellFormed, RefusesEveryExampleCutShortOrFollowedByMore) {
   }
 }
 
+TEST(WellFormed, SaysWhatIsWrong) {
+  const std::pair<const char*, const char*> frames[] = {
+      {"", "the frame ends inside an item"},
+      {"19", "the frame ends inside an item"},
+      {"81", "the frame ends inside an item"},
+      {"6261", "the frame ends inside an item"},
+      {"5f", "the frame ends inside an item"},
+      {"5f41", "the frame ends inside an item"},
+      {"9bffffffffffffffff", "the frame ends inside an item"},
+      {"1c00", "a reserved item head"},
+      {"f81f", "a reserved item head"},
+      {"5f1c00", "a reserved item head"},
+      {"ff", "a break outside an open container"},
+      {"81ff", "a break outside an open container"},
+      {"5f6100ff", "a string whose parts are no strings of its kind"}};
+  for (const auto& [hex, why] : frames) {
+    EXPECT_STREQ(checkOneItem(asBytes(fromHex(hex))), why) << hex;
+  }
+}
+
 TEST(WellFormed, AMillionContainersInsideEachOtherAreWalkedWithoutAStack) {
   constexpr std::size_t kDepth = 1000000;
   EXPECT_EQ(checkOneItem(asBytes(std::string(kDepth, '\x81') + '\0')), nullptr);

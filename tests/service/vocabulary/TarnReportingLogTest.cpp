@@ -109,6 +109,7 @@ TEST_F(TarnReportingLogTest, EveryCategoryHasItsCodeUnderTheOneSubsystem) {
 TEST_F(TarnReportingLogTest, IntegersPrintInDecimalWhateverTheirWidth) {
   EXPECT_EQ(formatted("%i %d %lli %lld %li %ld", -1, 2, std::numeric_limits<std::int64_t>::min(), 4LL, 5L, 6L),
             "-1 2 -9223372036854775808 4 5 6");
+  EXPECT_EQ(formatted("%hi %ji %ti %qi %s", 1, 2, 3, 4, 5), "1 2 3 4 5");
   EXPECT_EQ(formatted("%u %lu %llu %zu", 1U, 2UL, std::numeric_limits<std::uint64_t>::max(), std::size_t{4}),
             "1 2 18446744073709551615 4");
 }
