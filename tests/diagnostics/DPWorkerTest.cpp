@@ -279,8 +279,8 @@ TEST_F(DPWorker, NoWaitIsLongerThanTheBound) {
   };
   const double kInfinite = std::numeric_limits<double>::infinity();
   for (const Case& row : {Case{{}, {}}, Case{0, {}}, Case{-1e9, {}}, Case{std::nan(""), {}}, Case{-kInfinite, {}},
-                          Case{4'999'999, {4'999'999us}}, Case{5'000'001, {5s}}, Case{1e300, {5s}},
-                          Case{kInfinite, {5s}}, Case{"1000 or so", {1ms}}}) {
+                          Case{1, {1us}}, Case{0.5, {500ns}}, Case{4'999'999, {4'999'999us}}, Case{5'000'001, {5s}},
+                          Case{1e300, {5s}}, Case{kInfinite, {5s}}, Case{"1000 or so", {1ms}}}) {
     set("wait_time", row.setting);
     const std::size_t before = platform_.conditions.timeouts().size();
     EXPECT_EQ(gyresOf({{"smallest_buffer_frame_size", 512}}), 1U);
@@ -357,6 +357,16 @@ TEST_F(DPWorker, AnOverloadThatDoesNotCountWaitsForNothing) {
             (Strings{"log Interested in overload",
                      "log Did not drop gyre, right conditions not met: buffer size : 511, time diff : "
                      "1750000000.000000, io cycle: 0"}));
+}
+
+TEST_F(DPWorker, WithoutAWaitThereIsNoCondition) {
+  EXPECT_EQ(gyresOf({{"smallest_buffer_frame_size", 512}}), 1U);
+  EXPECT_TRUE(platform_.conditions.made().empty());
+}
+
+TEST_F(DPWorker, TheFirstOverloadCountsWhateverTheClockSays) {
+  platform_.clock.setEpochSeconds(5);
+  EXPECT_EQ(gyresOf({{"smallest_buffer_frame_size", 512}}), 1U);
 }
 
 TEST_F(DPWorker, AWaitThatEndsToTheNanosecondIsOver) {

@@ -301,6 +301,24 @@ TEST_F(MemoryLogWorker, MegabytesAreCutWithALine) {
   EXPECT_EQ(notes()[2], "wiredlog: request /usr/bin/zonetally -l captured");
 }
 
+TEST_F(MemoryLogWorker, AsMuchAsIsKeptIsTheEndToTheByte) {
+  const std::size_t lineCount = Worker::kMostBytesKept / 128;
+  std::size_t bytes = 0;
+  for (const std::string& block : blocksOf(kZones, taggedLines(lineCount + 1, 128))) {
+    bytes += block.size() - block.find('\n') - 1;
+  }
+  EXPECT_EQ(bytes, Worker::kMostBytesKept);
+}
+
+TEST_F(MemoryLogWorker, AByteLessThanIsReadIsNotTheEnd) {
+  std::string noise = std::string(1022, 'x') + "\n";
+  while (noise.size() + 1 < Worker::kMostBytesRead) {
+    noise.append(1023, 'x').append(1, '\n');
+  }
+  EXPECT_EQ(noise.size() + 1, Worker::kMostBytesRead);
+  EXPECT_EQ(blocksOf(kResources, noise + "RESOURCE\n"), (Strings{"WIRED LOG BLOCK 1\nwiredlog: RESOURCE\n"}));
+}
+
 TEST_F(MemoryLogWorker, MegabytesThatNobodyKeepsAreReadWithinABoundToo) {
   constexpr std::size_t kLine = 1024;
   std::string noise;
@@ -444,18 +462,22 @@ TEST_F(MemoryLogWorker, ABlockOfAsMuchAsAnEntryHoldsIsOneEntry) {
 }
 
 TEST_F(MemoryLogWorker, AnEntryOfABlockDoesNotEndInsideACharacter) {
-  std::string line;
-  while (line.size() < 100'000) {
-    line += "\xE2\x82\xAC";
-  }
-  for (const char* lead : {"", "a", "ab"}) {
-    for (const std::string& entry : blocksOf(kZones, lead + line + "\n")) {
-      EXPECT_NE(static_cast<unsigned char>(entry[entry.find('\n') + 1]) & 0xC0U, 0x80U);
-      EXPECT_FALSE(entry.empty());
+  for (const char* character : {"\xE2\x82\xAC", "\xE2\x81\xBF"}) {
+    std::string line;
+    while (line.size() < 100'000) {
+      line += character;
+    }
+    for (const char* lead : {"", "a", "ab"}) {
+      for (const std::string& entry : blocksOf(kZones, lead + line + "\n")) {
+        EXPECT_NE(static_cast<unsigned char>(entry[entry.find('\n') + 1]) & 0xC0U, 0x80U);
+        EXPECT_FALSE(entry.empty());
+      }
     }
   }
-  // Bytes that are no characters are cut all the same.
-  EXPECT_EQ(blocksOf(kZones, std::string(100'000, '\x80') + "\n").size(), 2U);
+  // Bytes that are no characters are cut all the same, at the most as much earlier as a character is long.
+  const Strings cut = blocksOf(kZones, std::string(100'000, '\x80') + "\n");
+  ASSERT_EQ(cut.size(), 2U);
+  EXPECT_EQ(cut[0].size() - cut[0].find('\n') - 1, 65468U);
 }
 
 TEST_F(MemoryLogWorker, BoundsAreAsDocumented) {

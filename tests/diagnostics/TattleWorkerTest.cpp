@@ -315,6 +315,19 @@ TEST_F(TattleWorker, AMomentOfZeroIsNotArmedYet) {
   EXPECT_EQ(prompts(), 1U);
 }
 
+TEST_F(TattleWorker, AMomentOfLessThanASecondIsArmed) {
+  const auto session = startedSession();
+  TarnReportingSessionTattleWorker worker(session, kHour);
+  const auto handle = [&worker](double stamp) {
+    worker.handleMessage(message({{"plac_invalid_x", 1}, {"tarnreporting_timestamp", stamp}}));
+  };
+  handle(-4.5);
+  EXPECT_EQ(worker.minimumMessageTime(), 0.5);
+  handle(100);
+  EXPECT_EQ(worker.minimumMessageTime(), 0.5);
+  EXPECT_EQ(prompts(), 1U);
+}
+
 TEST_F(TattleWorker, ClaimsThePeriodThenTellsThenPrompts) {
   const auto session = armedSession(9);
   platform_.order.start();

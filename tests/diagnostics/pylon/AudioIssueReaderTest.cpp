@@ -307,6 +307,16 @@ TEST(WireReader, NoOtherTypeIsSkipped) {
   }
 }
 
+TEST(WireReader, GroupThatHasNoEndOfItsOwnIsNotSkipped) {
+  const std::string tooDeep = std::string(WireReader::kDeepestGroup, '\x33') + std::string(200, '\x34');
+  for (const std::string& group : {""s, "\x81"s, "\x3c"s, "\x33\x3c"s, tooDeep}) {
+    WireReader reader(group);
+    EXPECT_FALSE(reader.skip(6, 3));
+    EXPECT_TRUE(reader.failed());
+    EXPECT_EQ(reader.position(), 0U);
+  }
+}
+
 TEST(WireReader, GroupsAreSkippedAHundredDeep) {
   EXPECT_EQ(WireReader::kDeepestGroup, 100U);
 }

@@ -408,6 +408,7 @@ TEST_F(SnareAlarms, OtherIssuesCategoriesAndTypesAreOfNoInterest) {
   send(plist::DataView{"LowRMS"}, 11, AudioEventType::IssueDetector);
   session->sendMessage(message({}, AudioEventCategory::Error, AudioEventType::IssueDetector));
   EXPECT_EQ(stateOf(session, kAlarmLowRMS).interestedCount, 0U);
+  EXPECT_TRUE(calls().empty());  // nor did they add up to a capture
 }
 
 class SnareRecordQueues : public SnareFixture {};

@@ -24,7 +24,31 @@ constexpr const char* kBuds = "speaker, kbdQ ( 0f3e ) ( 7305 ), other";
 constexpr double kDay = 86400;
 constexpr double kWeek = 604800;
 
-// Accessory queries whose second part is a surprise.
+// Accessory queries that note what they are asked: "enumerate", "left 0", "case of 0".
+class NotedQueries final : public platform::AccessoryQueries {
+ public:
+  explicit NotedQueries(std::uint16_t count) : count_(count) {}
+  platform::Outcome<std::uint16_t> enumerate() override {
+    asked_.emplace_back("enumerate");
+    return {count_, {}};
+  }
+  bool hasCase(std::uint16_t accessoryIndex) const override {
+    asked_.push_back("case of " + std::to_string(accessoryIndex));
+    return accessoryIndex == 0;
+  }
+  plist::Dictionary parameters(AccessoryPart part, std::uint16_t accessoryIndex) const override {
+    const char* const name = part == AccessoryPart::Left ? "left " : part == AccessoryPart::Right ? "right " : "case ";
+    asked_.push_back(name + std::to_string(accessoryIndex));
+    return {};
+  }
+  const std::vector<std::string>& asked() const noexcept { return asked_; }
+
+ private:
+  const std::uint16_t count_;
+  mutable std::vector<std::string> asked_;
+};
+
+// Earbuds, with their case or without.
 FakeAccessoryQueries::Accessory buds(double lastConnected, bool withCase = false) {
   FakeAccessoryQueries::Accessory accessory{
       {AccessoryPart::Left, {{"lastConnectedEpoch", lastConnected}, {"serial", "L"}}},
@@ -205,6 +229,25 @@ TEST_F(AudioRegistration, BaseUnitAsksOnlyForDevicesThatItCounted) {
   EXPECT_EQ(platform_.accessories.askedFor(), (std::vector<std::uint16_t>{}));
   unit.loadParams(AccessoryPart::Left, 0);
   EXPECT_EQ((*info)["splunk"].array().size(), 1U);
+}
+
+TEST_F(AudioRegistration, EachAccessoryIsAskedForItsLeftItsRightAndItsCaseOnce) {
+  NotedQueries queries(2);
+  platform_.facilities().accessories = &queries;
+  handle(kBuds);
+  EXPECT_EQ(queries.asked(), (std::vector<std::string>{"enumerate", "left 0", "right 0", "case of 0", "case 0",
+                                                       "left 1", "right 1", "case of 1"}));
+}
+
+TEST_F(AudioRegistration, StartIsToldBeforeTheWorkerRuns) {
+  std::vector<bool> running;
+  platform_.order.start([&](const std::string& entry) {
+    if (entry == "log Starting TarnReportingSessionAudioRegistrationWorker") {
+      running.push_back(worker_->started());
+    }
+  });
+  worker_->start();
+  EXPECT_EQ(running, (std::vector<bool>{false}));
 }
 
 TEST_F(AudioRegistration, MinuteAndDayCountFromTheEndOfTheEnumeration) {
@@ -612,7 +655,11 @@ TEST_F(AudioRegistration, DefaultsOfOtherKindsAreReadAsNumbers) {
 TEST_F(AudioRegistration, StoreThatCannotBeWrittenIsLoggedAndTheProcessGoesOn) {
   platform_.defaults.failWrites(true);
   handle(kBuds);
-  EXPECT_TRUE(platform_.log.contains(platform::LogLevel::Error, "failed to store " + std::string(kCheckKey)));
+  const auto errors = platform_.log.entries(platform::LogLevel::Error);
+  ASSERT_EQ(errors.size(), 2U);
+  EXPECT_EQ(errors[0].message(), "failed to store " + std::string(kCheckKey));
+  EXPECT_EQ(errors[1].message(), "failed to store " + std::string(kInfoKey));
+  EXPECT_EQ(errors[0].module, "TarnReportingRegistrationState");
   handle(kBuds);
   EXPECT_EQ(platform_.accessories.enumerations(), 1U);
 }

@@ -89,6 +89,16 @@ TEST(WorkWeek, LastDaysOfDecemberBelongToTheNextYearsFirstWeek) {
   EXPECT_EQ(TarnReportingWorkWeek(saturday), 52);
 }
 
+TEST(WorkWeek, CenturyIsNoLeapYear) {
+  platform::LocalTime day;  // 2100-12-31, a Friday: its Saturday is the first of January
+  day.year = 2100;
+  day.month = 12;
+  day.day = 31;
+  day.dayOfYear = 364;
+  day.dayOfWeek = 5;
+  EXPECT_EQ(TarnReportingWorkWeek(day), 1);
+}
+
 TEST(WorkWeek, LeapYearThatBeginsOnASaturdayHasFiftyThreeWeeks) {
   platform::LocalTime day;  // 2000-12-30, a Saturday
   day.year = 2000;

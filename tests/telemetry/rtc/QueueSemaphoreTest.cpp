@@ -67,6 +67,22 @@ TEST_F(QueueSemaphore, CountsItsSignals) {
   EXPECT_EQ(ran_.size(), 4U);
 }
 
+TEST_F(QueueSemaphore, SignalThatEndedAWaitIsSpent) {
+  waitFor(9s);
+  semaphore_.signal();
+  queues_.runUntilIdle();
+  waitFor(9s);
+  EXPECT_EQ(ran_, (std::vector<std::string>{"signal", "behind"}));
+}
+
+TEST_F(QueueSemaphore, LetsGoOfTheQueueWhenTheWaitIsOver) {
+  waitFor(9s);
+  queues_.advance(9s);
+  const std::weak_ptr<platform::SuspendableQueue> queue = queue_;
+  queue_.reset();
+  EXPECT_TRUE(queue.expired());
+}
+
 TEST_F(QueueSemaphore, SignalThatComesWhileTheTimeRunsOutCounts) {
   waitFor(9s);
   clock_.advance(9s);

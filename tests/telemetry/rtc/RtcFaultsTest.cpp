@@ -112,6 +112,26 @@ TEST_F(RtcFaults, WaitEndsAfterNineSecondsAndNotBefore) {
   EXPECT_EQ(onlySession().flushes, 0U);
 }
 
+TEST_F(RtcFaults, GivingUpIsToldBeforeTheSessionIsLetGo) {
+  std::vector<std::pair<std::string, bool>> released;
+  platform_.order.start([&](const std::string& entry) {
+    if (entry == "log timed out waiting for backends" || entry == "log failed to find backend") {
+      released.emplace_back(entry, platform_.rtcReporting.sessions().back().released);
+    }
+  });
+  completions().set(ReplyFault::Drop);
+  const auto late = startSession();
+  platform_.advance(9s);
+  completions().set(ReplyFault::None);
+  platform_.rtcReporting.setBackends({});
+  const auto refused = startSession();
+  EXPECT_EQ(released, (std::vector<std::pair<std::string, bool>>{{"log timed out waiting for backends", false},
+                                                                 {"log failed to find backend", false}}));
+  for (const RtcSession& made : platform_.rtcReporting.sessions()) {
+    EXPECT_TRUE(made.released);
+  }
+}
+
 TEST_F(RtcFaults, SessionThatCantBeMadeTimesOut) {
   platform_.rtcReporting.setMakesSessions(false);
   startSession();
@@ -275,6 +295,17 @@ TEST_F(RtcFaults, StopOfALiveMirrorHelpsNothing) {
   EXPECT_TRUE(onlySession().messages.empty());
   platform_.runUntilIdle();
   EXPECT_EQ(onlySession().messages.size(), 2U);
+}
+
+TEST_F(RtcFaults, StopOfAWorkerThatWasNeverStartedHelpsNothing) {
+  platform_.workQueues.setHelps(true);
+  const auto session = makeTyped(AudioServiceType::Haptics);
+  const auto worker = TarnReportingSessionRtcWorker::initWithSession(session);
+  worker->handleMessage(message({{"n", 1}}));
+  worker->stop();
+  EXPECT_TRUE(lines().empty());
+  platform_.runUntilIdle();
+  EXPECT_EQ(lines(), (Texts{"default Session never started. handleMessage", "default Session never started. stop"}));
 }
 
 TEST_F(RtcFaults, WorkerMayBeGoneWhileItsQueueWorks) {

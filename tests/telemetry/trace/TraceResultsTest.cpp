@@ -118,6 +118,20 @@ TEST_F(TraceResults, SignpostsComeBeforeProbesAndAllValuesBeforeTheExtensions) {
   for (const auto& extension : file().extensions) EXPECT_EQ(extension.valuesBefore, 6U);
 }
 
+TEST_F(TraceResults, EachMeasurementIsToldBeforeItIsWritten) {
+  analysis().setIntervals({interval("a", 1), interval("a", 1)});
+  analysis().setProbes({probe("p", {1, 1})});
+  std::vector<std::pair<std::string, std::size_t>> written;
+  platform_.order.start([&](const std::string& entry) {
+    if (entry.starts_with("log name:")) {
+      written.emplace_back(entry.substr(9, 7), file().values.size());
+    }
+  });
+  play();
+  EXPECT_EQ(written, (std::vector<std::pair<std::string, std::size_t>>{
+                         {"a time:", 0}, {"a time:", 1}, {"event o", 4}, {"event o", 5}}));
+}
+
 TEST_F(TraceResults, TraceThatLacksEventsIsSaidToBeCut) {
   platform_.performanceTrace.setEventsLeftOut(12345);
   play();
@@ -354,6 +368,7 @@ TEST_F(TraceResults, TraceThatCannotBeOpenedIsLogged) {
 }
 
 TEST_F(TraceResults, TraceWithoutReadableIntervalsStillGivesItsProbes) {
+  analysis().setIntervals({interval("a", 1)});
   analysis().failIntervals(PlatformError{22, "cut off"});
   analysis().setProbes({probe("p", {0.001})});
   play();

@@ -155,6 +155,53 @@ TEST_F(TraceWorker, WakeUpAtTheVeryEndOfTheTimeIsTheEnd) {
   EXPECT_EQ(errors(), Strings{kStartTimedOut});
 }
 
+TEST_F(TraceWorker, WakeUpANanosecondBeforeTheEndIsNotTheEnd) {
+  facility().callbacks().set(ReplyFault::Hold);
+  platform_.conditions.onWait([this](auto timeout) {
+    platform_.clock.advance(timeout.count() > 1 ? 15s - 1ns : 1ns);
+    return WaitOutcome::Wakes;
+  });
+  makeTestSession()->start();
+  EXPECT_EQ(waits(), (std::vector<double>{15, 1e-9}));
+}
+
+TEST_F(TraceWorker, EachAnswerWakesWhoeverWaits) {
+  play();
+  ASSERT_EQ(platform_.conditions.made().size(), 1U);
+  EXPECT_EQ(platform_.conditions.made()[0]->signals(), 2U);  // the start and the completion
+}
+
+TEST_F(TraceWorker, WordsThatComeAgainAreNoWords) {
+  const auto condition = std::make_shared<ManualCondition>(nullptr);
+  TarnReportingTraceRecording recording(nullptr, condition);
+  EXPECT_EQ(recording.eventsLeftOut(), 0U);
+  for (const char* location : {"/device/traces/first", "/device/traces/second"}) {
+    recording.performanceTraceDidStart({});
+    recording.performanceTraceDidStop({});
+    recording.performanceTraceDidComplete(location, "token", {});
+  }
+  EXPECT_EQ(recording.finalTraceURL(), "/device/traces/first");
+  EXPECT_EQ(condition->signals(), 2U);
+  EXPECT_EQ(lines(LogLevel::Info), (Strings{"Performance Trace Started", "Performance Trace Stopped",
+                                            "Performance Trace Completed: /device/traces/first"}));
+}
+
+TEST_F(TraceWorker, SessionIsLetGoBeforeItsErrorIsTold) {
+  Strings told;
+  platform_.order.start([&](const std::string& entry) {
+    if (entry.starts_with("log performanceTraceDid")) {
+      told.push_back(entry + (facility().traces().back().released ? "!" : "?"));
+    }
+  });
+  const auto recording = [this] {
+    return std::make_shared<TarnReportingTraceRecording>(facility().createSession({}),
+                                                         platform_.conditions.makeCondition());
+  };
+  recording()->performanceTraceDidStart(PlatformError{5, "no buffer"});
+  recording()->performanceTraceDidStop(PlatformError{5, "disk gone"});
+  EXPECT_EQ(told, (Strings{"log performanceTraceDidStart no buffer!", "log performanceTraceDidStop disk gone!"}));
+}
+
 // A condition whose every wait says that the time is up.
 class ImpatientCondition final : public platform::Condition {
  public:
