@@ -1,4 +1,3 @@
-#include "tests/support/Seeds.h"
 #include "wire/FrameBuffer.h"
 
 #include <gtest/gtest.h>
@@ -9,6 +8,7 @@
 #include <vector>
 
 #include "tests/support/HeapUse.h"
+#include "tests/support/Seeds.h"
 #include "tests/wire/Bytes.h"
 
 namespace tarn::wire {
@@ -130,9 +130,18 @@ TEST(FrameBuffer, MemoryStaysWithinTheLargestFrameAndAGulpAndShrinksBack) {
   EXPECT_LT(heap.bytes(), kGulp + kSlack);
 }
 
-TEST(FrameBuffer, HoldsNoMemoryAndKnowsNoLengthBeforeBytesCome) {
+// A buffer whose memory is told in gulps. What it is fed must be made before it.
+struct WatchedBuffer {
+  const HeapGrowth heap;
   FrameBuffer buffer;
-  EXPECT_EQ(buffer.capacityBytes(), 0U);
+
+  std::ptrdiff_t gulps() const { return (heap.bytes() + kGulp / 2) / kGulp; }
+};
+
+TEST(FrameBuffer, HoldsNoMemoryAndKnowsNoLengthBeforeBytesCome) {
+  const HeapGrowth heap;
+  FrameBuffer buffer;
+  EXPECT_LT(heap.bytes(), kSlack);
   feed(buffer, testing::fromHex("020100"));
   EXPECT_EQ(buffer.announcedBytes(), 0U);
 }
@@ -172,46 +181,47 @@ TEST(FrameBuffer, SpaceIsWholeAgainOnceEverythingIsTaken) {
 TEST(FrameBuffer, GrowsWhenMoreThanHalfAGulpIsPending) {
   const std::string stream = framed(std::string(100000, 'x'));
   for (const std::size_t bytes : {kHalf, kHalf + 1}) {
-    FrameBuffer buffer;
-    feed(buffer, std::string_view(stream).substr(0, bytes));
-    takeAll(buffer);
-    buffer.space();
-    EXPECT_EQ(buffer.capacityBytes(), (bytes > kHalf ? 2 : 1) * FrameBuffer::kGulpBytes);
+    WatchedBuffer watched;
+    feed(watched.buffer, std::string_view(stream).substr(0, bytes));
+    takeAll(watched.buffer);
+    watched.buffer.space();
+    EXPECT_EQ(watched.gulps(), bytes > kHalf ? 2 : 1);
   }
 }
 
-// Feeds the whole stream, taking frames on the way; the memory that was held when the last byte came.
-std::size_t feedAll(FrameBuffer& buffer, std::string_view stream, std::vector<std::string>& frames) {
-  std::size_t capacity = 0;
+// Feeds the whole stream, dropping frames on the way; the gulps that were held when the last byte came.
+std::ptrdiff_t feedAll(WatchedBuffer& watched, std::string_view stream) {
+  std::ptrdiff_t gulps = 0;
   for (std::size_t at = 0; at < stream.size();) {
-    at += feed(buffer, stream.substr(at));
-    capacity = buffer.capacityBytes();
-    for (std::string& frame : takeAll(buffer)) frames.push_back(std::move(frame));
+    at += feed(watched.buffer, stream.substr(at));
+    gulps = watched.gulps();
+    takeAll(watched.buffer);
   }
-  return capacity;
+  return gulps;
 }
 
 TEST(FrameBuffer, TwiceTheMemoryIsKeptAndFourTimesIsGivenBack) {
-  std::vector<std::string> frames;
-  FrameBuffer buffer;
-  EXPECT_EQ(feedAll(buffer, framed(std::string(80000, 'x')), frames), 2 * FrameBuffer::kGulpBytes);
-  buffer.space();
-  EXPECT_EQ(buffer.capacityBytes(), 2 * FrameBuffer::kGulpBytes);
-  EXPECT_EQ(feedAll(buffer, framed(std::string(200000, 'x')), frames), 4 * FrameBuffer::kGulpBytes);
-  buffer.space();
-  EXPECT_EQ(buffer.capacityBytes(), FrameBuffer::kGulpBytes);
+  const std::string twice = framed(std::string(80000, 'x'));
+  const std::string fourTimes = framed(std::string(200000, 'x'));
+  WatchedBuffer watched;
+  EXPECT_EQ(feedAll(watched, twice), 2);
+  watched.buffer.space();
+  EXPECT_EQ(watched.gulps(), 2);
+  EXPECT_EQ(feedAll(watched, fourTimes), 4);
+  watched.buffer.space();
+  EXPECT_EQ(watched.gulps(), 1);
 }
 
 TEST(FrameBuffer, ASinglePendingByteSurvivesTheShrinking) {
-  std::vector<std::string> frames;
-  FrameBuffer buffer;
   const std::string next = framed("next!");
-  feedAll(buffer, framed(std::string(200000, 'x')) + next[0], frames);
-  ASSERT_EQ(buffer.pendingBytes(), 1U);
-  buffer.space();
-  ASSERT_EQ(buffer.capacityBytes(), FrameBuffer::kGulpBytes);
-  feed(buffer, std::string_view(next).substr(1));
-  EXPECT_EQ(takeAll(buffer), std::vector<std::string>{"next!"});
+  const std::string stream = framed(std::string(200000, 'x')) + next[0];
+  WatchedBuffer watched;
+  feedAll(watched, stream);
+  ASSERT_EQ(watched.buffer.pendingBytes(), 1U);
+  watched.buffer.space();
+  ASSERT_EQ(watched.gulps(), 1);
+  feed(watched.buffer, std::string_view(next).substr(1));
+  EXPECT_EQ(takeAll(watched.buffer), std::vector<std::string>{"next!"});
 }
 
 TEST(FrameBuffer, ReleaseGivesMemoryBackOnlyWhenNothingIsPending) {
