@@ -82,10 +82,11 @@ inline std::string askOne(const std::filesystem::path& file, const std::string& 
   return rows.empty() ? std::string() : rows.front();
 }
 
-// Changes a file that no recorder has open.
+// Changes a file, once a recorder that has it open is at rest.
 inline void change(const std::filesystem::path& file, const std::string& sql) {
   sqlite3* database = nullptr;
   ASSERT_EQ(sqlite3_open(file.c_str(), &database), SQLITE_OK);
+  sqlite3_busy_timeout(database, 10'000);
   EXPECT_EQ(sqlite3_exec(database, sql.c_str(), nullptr, nullptr, nullptr), SQLITE_OK) << sqlite3_errmsg(database);
   sqlite3_close(database);
 }

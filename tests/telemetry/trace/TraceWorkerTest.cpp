@@ -168,7 +168,7 @@ TEST_F(TraceWorker, WakeUpANanosecondBeforeTheEndIsNotTheEnd) {
 TEST_F(TraceWorker, EachAnswerWakesWhoeverWaits) {
   play();
   ASSERT_EQ(platform_.conditions.made().size(), 1U);
-  EXPECT_EQ(platform_.conditions.made()[0]->signals(), 2U);  // the start and the completion
+  EXPECT_EQ(platform_.conditions.made()[0]->signals(), 3U);  // the start, and the completion for both waits
 }
 
 TEST_F(TraceWorker, WordsThatComeAgainAreNoWords) {
@@ -181,7 +181,7 @@ TEST_F(TraceWorker, WordsThatComeAgainAreNoWords) {
     recording.performanceTraceDidComplete(location, "token", {});
   }
   EXPECT_EQ(recording.finalTraceURL(), "/device/traces/first");
-  EXPECT_EQ(condition->signals(), 2U);
+  EXPECT_EQ(condition->signals(), 3U);
   EXPECT_EQ(lines(LogLevel::Info), (Strings{"Performance Trace Started", "Performance Trace Stopped",
                                             "Performance Trace Completed: /device/traces/first"}));
 }
