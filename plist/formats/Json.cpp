@@ -28,12 +28,12 @@ void appendJsonNumber(std::string& out, Floating value) {
 }
 
 void appendJsonDate(std::string& out, Date date) {
-  const auto calendar = detail::calendarDate(date.epochSeconds);
+  const auto calendar = calendarDate(date.epochSeconds);
   if (!calendar) {
     return appendJsonNumber(out, date.epochSeconds);
   }
   out += '"';
-  detail::appendDateAndTime(out, *calendar, 'T');
+  appendDateAndTime(out, *calendar, 'T');
   if (calendar->microsecond != 0) {
     std::string decimals = std::to_string(1000000 + calendar->microsecond);
     decimals.front() = '.';

@@ -8,6 +8,7 @@
 #include <thread>
 #include <utility>
 
+#include "plist/Hex.h"
 #include "recorder/store/GlobPattern.h"
 #include "recorder/store/Statement.h"
 
@@ -57,9 +58,8 @@ std::string uriOf(const std::string& path) {
   std::string uri = "file:";
   for (const char c : path) {
     if (c == '%' || c == '?' || c == '#') {
-      constexpr const char* kDigits = "0123456789abcdef";
-      const auto byte = static_cast<unsigned char>(c);
-      uri.append({'%', kDigits[byte >> 4], kDigits[byte & 15]});
+      uri += '%';
+      plist::appendHex(uri, c);
     } else {
       uri.push_back(c);
     }

@@ -1,11 +1,10 @@
 #include "service/vocabulary/DataSerialize.h"
 
 #include <algorithm>
-#include <chrono>
 #include <cmath>
-#include <cstdio>
 #include <string_view>
 
+#include "plist/CalendarDate.h"
 #include "plist/Characters.h"
 #include "plist/Dictionary.h"
 #include "plist/formats/Json.h"
@@ -106,22 +105,13 @@ class XmlWriter {
   }
 
   bool writeDate(plist::Date date) {
-    using namespace std::chrono;
-    constexpr double kYear1 = -62135596800.0;
-    constexpr double kYear10000 = 253402300800.0;
-    if (!(date.epochSeconds >= kYear1 && date.epochSeconds < kYear10000)) {
+    const auto calendar = plist::calendarDate(std::floor(date.epochSeconds));
+    if (!calendar) {
       return false;
     }
-    const sys_seconds moment{seconds(static_cast<std::int64_t>(std::floor(date.epochSeconds)))};
-    const sys_days day = floor<days>(moment);
-    const year_month_day calendar{day};
-    const hh_mm_ss time{moment - day};
-    char text[40];
-    static_cast<void>(std::snprintf(text, sizeof text, "%04d-%02u-%02uT%02d:%02d:%02dZ",
-                                    static_cast<int>(calendar.year()), static_cast<unsigned>(calendar.month()),
-                                    static_cast<unsigned>(calendar.day()), static_cast<int>(time.hours().count()),
-                                    static_cast<int>(time.minutes().count()),
-                                    static_cast<int>(time.seconds().count())));
+    std::string text;
+    plist::appendDateAndTime(text, *calendar, 'T');
+    text += 'Z';
     return element("date", text);
   }
 
