@@ -4,7 +4,7 @@
 #include <nlohmann/json.hpp>
 
 #include "host/system/JsonValues.h"
-#include "plist/formats/Json.h"
+#include "plist/formats/Base64.h"
 
 namespace tarn::linux_host {
 

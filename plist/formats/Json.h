@@ -6,9 +6,7 @@
 // number that is not finite as the text "nan", "inf" or "-inf".
 #pragma once
 
-#include <optional>
 #include <string>
-#include <string_view>
 
 #include "plist/ValueView.h"
 
@@ -16,9 +14,5 @@ namespace tarn::plist {
 
 // Appends the value as compact JSON, members in their own order.
 void appendJson(std::string& out, const ValueView& value);
-// Appends the base64 form.
-void appendBase64(std::string& out, std::string_view bytes);
-// The bytes of a base64 text (RFC 4648, padded, no line breaks); nothing when it isn't one.
-std::optional<std::string> decodeBase64(std::string_view text);
 
 }  // namespace tarn::plist
