@@ -14,7 +14,7 @@
 namespace tarn::linux_host {
 namespace {
 
-TEST(WriteAll, WritesEverythingThatTheSystemTakesInPieces) {
+TEST(WriteAll, WritesMoreThanAPipeHolds) {
   std::array<int, 2> ends{};
   ASSERT_EQ(::pipe2(ends.data(), O_CLOEXEC), 0);
   const UniqueDescriptor reading(ends[0]);
@@ -35,6 +35,18 @@ TEST(WriteAll, WritesEverythingThatTheSystemTakesInPieces) {
   reader.join();
   EXPECT_FALSE(error);
   EXPECT_EQ(seen, content);
+}
+
+TEST(WriteAll, WhatWasTakenInPartIsNotTakenForAll) {
+  std::array<int, 2> ends{};
+  ASSERT_EQ(::pipe2(ends.data(), O_CLOEXEC | O_NONBLOCK), 0);
+  const UniqueDescriptor reading(ends[0]);
+  const UniqueDescriptor writing(ends[1]);
+
+  const auto error = writeAll(writing.get(), std::string(10'000'000, 'p'));
+
+  ASSERT_TRUE(error);
+  EXPECT_EQ(error->code, EAGAIN);
 }
 
 TEST(WriteAll, FullDiskIsTold) {
@@ -62,7 +74,7 @@ TEST(CreateDirectories, MakesWhatIsMissingAndLeavesWhatIsThere) {
   EXPECT_EQ(facts.st_mode & 0777U, 0700U);
 }
 
-TEST(CreateDirectories, ThoseThatRefuseToBeMadeAreFineWhenTheyAreThere) {
+TEST(CreateDirectories, OneThatIsThereIsFineWhereNothingCanBeMade) {
   EXPECT_FALSE(createDirectories("/proc/self", 0750));
 }
 
