@@ -10,7 +10,7 @@
 #include "platform/Facilities.h"
 #include "platform/LocalCalendar.h"
 #include "plist/EscapedText.h"
-#include "plist/formats/PrettyJson.h"
+#include "plist/formats/Json.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
 #include "service/vocabulary/TarnReportingUtility.h"

@@ -3,7 +3,7 @@
 #include <chrono>
 #include <cmath>
 
-namespace tarn::plist::detail {
+namespace tarn::plist {
 
 namespace {
 
@@ -59,4 +59,14 @@ void appendDateAndTime(std::string& out, const CalendarDate& date, char between)
   appendPadded(out, date.second, 2);
 }
 
-}  // namespace tarn::plist::detail
+void appendCompactDateAndTime(std::string& out, const CalendarDate& date) {
+  appendPadded(out, date.year, 4);
+  appendPadded(out, date.month, 2);
+  appendPadded(out, date.day, 2);
+  out += '-';
+  appendPadded(out, date.hour, 2);
+  appendPadded(out, date.minute, 2);
+  appendPadded(out, date.second, 2);
+}
+
+}  // namespace tarn::plist

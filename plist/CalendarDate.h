@@ -1,11 +1,11 @@
-// A moment as a calendar date and time of day in UTC (proleptic Gregorian). Internal to plist/.
+// A moment as a calendar date and time of day in UTC (proleptic Gregorian). Stateless. Threads: any.
 #pragma once
 
 #include <cstdint>
 #include <optional>
 #include <string>
 
-namespace tarn::plist::detail {
+namespace tarn::plist {
 
 struct CalendarDate {
   int year;
@@ -22,5 +22,7 @@ std::optional<CalendarDate> calendarDate(double epochSeconds) noexcept;
 
 // Appends 2026-11-20<between>10:00:00.
 void appendDateAndTime(std::string& out, const CalendarDate& date, char between);
+// Appends 20261120-100000, for the names of files.
+void appendCompactDateAndTime(std::string& out, const CalendarDate& date);
 
-}  // namespace tarn::plist::detail
+}  // namespace tarn::plist

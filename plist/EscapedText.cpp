@@ -2,6 +2,8 @@
 
 #include <cstddef>
 
+#include "plist/Hex.h"
+
 namespace tarn::plist {
 
 namespace {
@@ -23,13 +25,9 @@ void appendControl(std::string& out, char character) {
     case '\t':
       out += "\\t";
       return;
-    default: {
-      constexpr std::string_view kHex = "0123456789abcdef";
-      const auto value = static_cast<unsigned char>(character);
+    default:
       out += "\\u00";
-      out += kHex[value >> 4U];
-      out += kHex[value & 0xFU];
-    }
+      appendHex(out, character);
   }
 }
 

@@ -6,6 +6,7 @@
 #include "plist/CalendarDate.h"
 #include "plist/Dictionary.h"
 #include "plist/EscapedText.h"
+#include "plist/Hex.h"
 #include "plist/ValueView.h"
 
 namespace tarn::plist {
@@ -81,8 +82,8 @@ void appendShortest(std::string& out, Floating value) {
 }
 
 void appendDate(std::string& out, Date date) {
-  if (const auto calendar = detail::calendarDate(std::floor(date.epochSeconds))) {
-    detail::appendDateAndTime(out, *calendar, ' ');
+  if (const auto calendar = calendarDate(std::floor(date.epochSeconds))) {
+    appendDateAndTime(out, *calendar, ' ');
     out += " +0000";
   } else {
     appendNumber(out, date.epochSeconds);
@@ -90,13 +91,8 @@ void appendDate(std::string& out, Date date) {
 }
 
 void appendData(std::string& out, std::string_view bytes) {
-  constexpr std::string_view kHex = "0123456789abcdef";
   out += '<';
-  for (const char byte : bytes) {
-    const auto value = static_cast<unsigned char>(byte);
-    out += kHex[value >> 4U];
-    out += kHex[value & 0xFU];
-  }
+  appendHex(out, bytes);
   out += '>';
 }
 

@@ -1,7 +1,8 @@
 #include "recorder/RecorderLog.h"
 
-#include <cstdio>
 #include <string>
+
+#include "platform/LogPrefix.h"
 
 namespace tarn::recorder {
 
@@ -24,9 +25,8 @@ void RecorderLog::write(platform::LogLevel level, std::string_view text, int lin
   if (level < log_.threshold()) {
     return;
   }
-  char prefix[48];
-  const int size = std::snprintf(prefix, sizeof prefix, "%25s:%-5d ", kModule.data(), line);
-  std::string whole(prefix, static_cast<std::size_t>(size));
+  std::string whole;
+  platform::appendLogPrefix(whole, kModule, line);
   whole.append(text);
   log_.write(platform::LogEntry{kCategory, level, kModule, line, whole});
 }

@@ -108,9 +108,9 @@ std::vector<AlsaFlume::Substream> AlsaFlume::substreams() {
   std::vector<Substream> found;
   bool complete = true;
   const auto list = [&](const std::string& path, std::size_t limit, auto isWanted) {
-    FolderNames names = folderNames(folder_ + path, limit, isWanted);
-    complete = complete && (names.complete || names.error != 0);
-    return std::move(names.names);
+    auto listed = folderNames(folder_ + path, limit, isWanted);
+    complete = complete && (listed.value.complete || listed.failed());
+    return std::move(listed.value.names);
   };
   for (const std::string& card : list("", kMostCards, [](auto name) { return isNumbered(name, "card"); })) {
     const std::string inCard = "/" + card;
@@ -135,20 +135,20 @@ std::vector<AlsaFlume::Substream> AlsaFlume::substreams() {
 }
 
 std::string AlsaFlume::cardName(const std::string& card) const {
-  const SmallFile id = readSmallFile(folder_ + "/" + card + "/id", kMaximumFileBytes);
-  std::string name = id.error == 0 ? alsaName(id.content) : std::string();
+  const auto id = readSmallFile(folder_ + "/" + card + "/id", kMaximumFileBytes);
+  std::string name = id.failed() ? std::string() : alsaName(id.value);
   return name.empty() ? card : name;
 }
 
 std::string AlsaFlume::read(const Substream& substream, SumsByPath& sums, FlumeSamples& samples) const {
   const std::string path = substream.path();
-  const SmallFile statusFile = readSmallFile(folder_ + "/" + path + "/status", kMaximumFileBytes);
-  const SmallFile infoFile = readSmallFile(folder_ + "/" + path + "/info", kMaximumFileBytes);
-  if (statusFile.error != 0 || infoFile.error != 0) {
-    return "can't be read" + errorSuffix(statusFile.error != 0 ? statusFile.error : infoFile.error);
+  const auto statusFile = readSmallFile(folder_ + "/" + path + "/status", kMaximumFileBytes);
+  const auto infoFile = readSmallFile(folder_ + "/" + path + "/info", kMaximumFileBytes);
+  if (statusFile.failed() || infoFile.failed()) {
+    return "can't be read" + errorSuffix(statusFile.failed() ? *statusFile.error : *infoFile.error);
   }
-  const auto status = parseAlsaStatus(statusFile.content);
-  const auto info = parseAlsaInfo(infoFile.content);
+  const auto status = parseAlsaStatus(statusFile.value);
+  const auto info = parseAlsaInfo(infoFile.value);
   if (!status || !info) {
     return status ? "tells no direction" : "tells no state";
   }

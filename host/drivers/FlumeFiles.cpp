@@ -33,13 +33,13 @@ FlumeFiles::FlumeFiles(std::string folder, platform::Log& log, const FlumeFilesB
 FlumeSamples FlumeFiles::read() {
   Gathered gathered;
   Complaints now;
-  const FolderNames found = folderNames(folder_, bounds_.files, isChannelFile);
-  if (found.error != 0 && found.error != ENOENT) {
-    now[""] = "can't be read" + errorSuffix(found.error);
-  } else if (!found.complete) {
+  const auto found = folderNames(folder_, bounds_.files, isChannelFile);
+  if (found.failed() && found.error->code != ENOENT) {
+    now[""] = "can't be read" + errorSuffix(*found.error);
+  } else if (!found.value.complete) {
     now[""] = "holds more than " + std::to_string(bounds_.files) + " files, the others are left out";
   }
-  for (const std::string& name : found.names) {
+  for (const std::string& name : found.value.names) {
     std::string complaint = readFile(name, gathered);
     // One that went while we looked is like one that wasn't there, unless it was there before.
     if (complaint != kGone || last_.contains(name)) {
@@ -71,18 +71,18 @@ std::string FlumeFiles::readFile(const std::string& name, Gathered& gathered) co
   if (!S_ISREG(facts.st_mode)) {
     return "is not a plain file";
   }
-  const SmallFile file = readSmallFile(path, bounds_.fileBytes);
-  if (file.error == EFBIG) {
+  const auto [content, error] = readSmallFile(path, bounds_.fileBytes);
+  if (error && error->code == EFBIG) {
     return "is larger than " + std::to_string(bounds_.fileBytes) + " bytes";
   }
-  if (file.error != 0) {
-    return file.error == ENOENT ? kGone : "can't be read" + errorSuffix(file.error);
+  if (error) {
+    return error->code == ENOENT ? kGone : "can't be read" + errorSuffix(*error);
   }
-  gathered.bytes += file.content.size();
+  gathered.bytes += content.size();
   if (gathered.bytes > bounds_.bytes) {
     return "is left out: there are more than " + std::to_string(bounds_.bytes) + " bytes of files";
   }
-  return takeChannels(parseFlumeFile(file.content, bounds_.file), gathered);
+  return takeChannels(parseFlumeFile(content, bounds_.file), gathered);
 }
 
 std::string FlumeFiles::takeChannels(FlumeFileReading reading, Gathered& gathered) const {

@@ -3,24 +3,25 @@
 #include <fcntl.h>
 #include <sys/stat.h>
 
-#include <cerrno>
 #include <utility>
+
+#include "host/system/SystemError.h"
 
 namespace tarn::linux_host {
 
 FileLog::FileLog(std::string path, const platform::Clock& clock, platform::LogLevel threshold)
     : LineLog(clock, threshold), path_(std::move(path)) {}
 
-int FileLog::open() {
+platform::MaybeError FileLog::open() {
   UniqueDescriptor opened(::open(path_.c_str(), O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC | O_NOCTTY, 0640));
   struct stat facts {};
   if (!opened || ::fstat(opened.get(), &facts) != 0) {
-    return errno;
+    return lastSystemError();
   }
   file_ = std::move(opened);
   device_ = facts.st_dev;
   inode_ = facts.st_ino;
-  return 0;
+  return {};
 }
 
 int FileLog::descriptor() {
@@ -29,13 +30,13 @@ int FileLog::descriptor() {
   if (same) {
     return file_.get();
   }
-  const int error = open();
-  if (error == 0) {
+  const auto error = open();
+  if (!error) {
     return file_.get();
   }
   // A file that was only renamed still takes the line; one that was removed would swallow it.
   const bool kept = file_ && ::fstat(file_.get(), &facts) == 0 && facts.st_nlink > 0;
-  return kept ? file_.get() : -error;
+  return kept ? file_.get() : -static_cast<int>(error->code);
 }
 
 }  // namespace tarn::linux_host

@@ -8,6 +8,7 @@
 
 #include "host/log/LineLog.h"
 #include "host/system/UniqueDescriptor.h"
+#include "platform/Outcome.h"
 
 namespace tarn::linux_host {
 
@@ -15,9 +16,9 @@ class FileLog final : public LineLog {
  public:
   FileLog(std::string path, const platform::Clock& clock, platform::LogLevel threshold);
 
-  // Opens the file, made with mode 0640 when it isn't there; 0 or an errno value. Called before the sink is used, to
+  // Opens the file, made with mode 0640 when it isn't there. Called before the sink is used, to
   // learn early whether it can be.
-  int open();
+  [[nodiscard]] platform::MaybeError open();
 
  private:
   int descriptor() override;

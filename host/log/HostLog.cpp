@@ -1,7 +1,6 @@
 #include "host/log/HostLog.h"
 
-#include <cstdio>
-#include <system_error>
+#include "platform/LogPrefix.h"
 
 namespace tarn::linux_host {
 
@@ -14,16 +13,10 @@ void hostLog(platform::Log& log, const platform::LogCategory& category, platform
 }
 
 std::string prefixed(std::string_view module, std::string_view text, int line) {
-  char prefix[96];
-  const int length =
-      std::snprintf(prefix, sizeof prefix, "%25.*s:%-5d ", static_cast<int>(module.size()), module.data(), line);
-  std::string whole(prefix, length > 0 ? static_cast<std::size_t>(length) : 0);
+  std::string whole;
+  platform::appendLogPrefix(whole, module, line);
   whole += text;
   return whole;
-}
-
-std::string errorSuffix(int error) {
-  return ": " + std::generic_category().message(error);
 }
 
 }  // namespace tarn::linux_host

@@ -5,6 +5,7 @@
 #include <string>
 #include <string_view>
 
+#include "host/system/SystemError.h"
 #include "platform/Log.h"
 
 namespace tarn::linux_host {
@@ -23,8 +24,5 @@ void hostLog(platform::Log& log, const platform::LogCategory& category, platform
 
 // The text with the prefix of its module and line, as every line has it.
 std::string prefixed(std::string_view module, std::string_view text, int line = __builtin_LINE());
-
-// ": " and the text of an errno value, for the end of a line.
-std::string errorSuffix(int error);
 
 }  // namespace tarn::linux_host

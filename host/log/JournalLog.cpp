@@ -26,12 +26,13 @@ JournalLog::JournalLog(platform::LogLevel threshold, Send send) : send_(send != 
 }
 
 // Asked beforehand because the journal's own call reports success when there is nobody to take the entry.
-std::optional<std::string> JournalLog::unavailable() {
+platform::MaybeError JournalLog::unavailable() {
   struct stat facts {};
   if (::stat(kJournalSocket, &facts) != 0) {
-    return std::string(kJournalSocket) + errorSuffix(errno);
+    const int error = errno;
+    return platform::PlatformError{error, kJournalSocket + errorSuffix(error)};
   }
-  return std::nullopt;
+  return {};
 }
 
 void JournalLog::write(const platform::LogEntry& entry) noexcept {

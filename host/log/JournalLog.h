@@ -14,10 +14,10 @@
 #include <sys/uio.h>
 
 #include <cstdint>
-#include <optional>
 #include <string>
 
 #include "platform/Log.h"
+#include "platform/Outcome.h"
 #include "platform/ThreadSafety.h"
 
 namespace tarn::linux_host {
@@ -33,7 +33,7 @@ class JournalLog final : public platform::Log {
   JournalLog& operator=(const JournalLog&) = delete;
 
   // What keeps the journal from taking entries on this machine; nothing when it is there.
-  static std::optional<std::string> unavailable();
+  static platform::MaybeError unavailable();
 
   void write(const platform::LogEntry& entry) noexcept override;
 

@@ -4,7 +4,8 @@
 #include <cmath>
 #include <cstdint>
 #include <cstdio>
-#include <ctime>
+
+#include "plist/CalendarDate.h"
 
 namespace tarn::linux_host {
 
@@ -33,13 +34,16 @@ std::string logTime(double epochSeconds) {
   const auto microseconds = static_cast<std::int64_t>(std::floor(epochSeconds * 1e6 + 0.5));
   std::int64_t fraction = microseconds % kMicrosecondsPerSecond;
   fraction += fraction < 0 ? kMicrosecondsPerSecond : 0;
-  const std::time_t seconds = (microseconds - fraction) / kMicrosecondsPerSecond;
-  std::tm calendar{};
-  ::gmtime_r(&seconds, &calendar);
-  std::array<char, 48> text{};
-  const std::size_t length = std::strftime(text.data(), text.size(), "%Y-%m-%dT%H:%M:%S", &calendar);
-  std::snprintf(text.data() + length, text.size() - length, ".%06lldZ", static_cast<long long>(fraction));
-  return text.data();
+  std::string text;
+  const auto second = static_cast<double>((microseconds - fraction) / kMicrosecondsPerSecond);
+  if (const auto calendar = plist::calendarDate(second)) {
+    plist::appendDateAndTime(text, *calendar, 'T');
+  } else {
+    text = std::to_string((microseconds - fraction) / kMicrosecondsPerSecond);
+  }
+  std::array<char, 16> decimals{};
+  std::snprintf(decimals.data(), decimals.size(), ".%06lldZ", static_cast<long long>(fraction));
+  return text + decimals.data();
 }
 
 std::string logLine(double epochSeconds, const platform::LogEntry& entry) {

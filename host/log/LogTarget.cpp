@@ -2,7 +2,6 @@
 
 #include <unistd.h>
 
-#include <optional>
 #include <utility>
 
 #include "host/log/FileLog.h"
@@ -16,15 +15,15 @@ OpenedLog openLog(std::string_view target, platform::LogLevel threshold, const p
     return {std::make_unique<StreamLog>(STDERR_FILENO, clock, threshold), {}};
   }
   if (target == "journal") {
-    if (const std::optional<std::string> reason = JournalLog::unavailable()) {
-      return {nullptr, "no journal on this machine: " + *reason};
+    if (const auto reason = JournalLog::unavailable()) {
+      return {nullptr, "no journal on this machine: " + reason->text};
     }
     return {std::make_unique<JournalLog>(threshold), {}};
   }
   const std::string path(target);
   auto file = std::make_unique<FileLog>(path, clock, threshold);
-  if (const int error = file->open(); error != 0) {
-    return {nullptr, "cannot open log file " + path + errorSuffix(error)};
+  if (const auto error = file->open()) {
+    return {nullptr, "cannot open log file " + path + errorSuffix(*error)};
   }
   return {std::move(file), {}};
 }

@@ -4,10 +4,13 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <cstdio>
+#include <cstdlib>
 #include <utility>
 
+#include "host/system/FileReplacement.h"
+#include "host/system/Files.h"
+#include "host/system/SmallFile.h"
 #include "host/system/SystemError.h"
 #include "host/system/UniqueDescriptor.h"
 
@@ -20,18 +23,6 @@ namespace {
 
 constexpr std::size_t kBlockBytes = std::size_t{64} * 1024;
 constexpr mode_t kFilePermissions = 0666;  // less the process's mask
-
-MaybeError writeAll(int descriptor, std::string_view bytes) {
-  while (!bytes.empty()) {
-    const ssize_t written = ::write(descriptor, bytes.data(), bytes.size());
-    if (written < 0) {
-      if (errno == EINTR) continue;
-      return lastSystemError();
-    }
-    bytes.remove_prefix(static_cast<std::size_t>(written));
-  }
-  return {};
-}
 
 // Holds nothing back: a disk that is full says so to the write that it refuses.
 class OpenFile final : public platform::WritableFile {
@@ -55,15 +46,7 @@ class OpenFile final : public platform::WritableFile {
   int descriptor_;  // -1 once closed
 };
 
-MaybeError createDirectory(const std::string& path, mode_t permissions) {
-  if (::mkdir(path.c_str(), permissions) == 0) return {};
-  const int failure = errno;
-  struct stat status {};
-  if (failure == EEXIST && ::stat(path.c_str(), &status) == 0 && S_ISDIR(status.st_mode)) return {};
-  return systemError(failure == EEXIST ? ENOTDIR : failure);
-}
-
-MaybeError copyContent(int from, int to) {
+MaybeError copyContent(int from, FileReplacement& to) {
   std::string block(kBlockBytes, '\0');
   for (;;) {
     const ssize_t got = ::read(from, block.data(), block.size());
@@ -72,7 +55,8 @@ MaybeError copyContent(int from, int to) {
       if (errno == EINTR) continue;
       return lastSystemError();
     }
-    if (auto error = writeAll(to, std::string_view(block).substr(0, static_cast<std::size_t>(got)))) return error;
+    to.write(std::string_view(block).substr(0, static_cast<std::size_t>(got)));
+    if (to.failure()) return to.failure();
   }
 }
 
@@ -81,18 +65,16 @@ MaybeError moveByCopy(const std::string& from, const std::string& to) {
   const UniqueDescriptor source(::open(from.c_str(), O_RDONLY | O_CLOEXEC));
   if (!source) return lastSystemError();
   std::string beside = to + ".XXXXXX";
-  const UniqueDescriptor copy(::mkostemp(beside.data(), O_CLOEXEC));
-  if (!copy) return lastSystemError();
+  UniqueDescriptor made(::mkostemp(beside.data(), O_CLOEXEC));
+  if (!made) return lastSystemError();
+  FileReplacement copy;
+  copy.begin(std::move(made), std::move(beside));
+  if (auto error = copyContent(source.get(), copy)) return error;
   struct stat status {};
-  auto error = copyContent(source.get(), copy.get());
-  if (!error && (::fstat(source.get(), &status) != 0 || ::fchmod(copy.get(), status.st_mode & 0777U) != 0 ||
-                 ::fsync(copy.get()) != 0 || ::rename(beside.c_str(), to.c_str()) != 0)) {
-    error = lastSystemError();
+  if (::fstat(source.get(), &status) != 0 || ::fchmod(copy.descriptor(), status.st_mode & 0777U) != 0) {
+    return lastSystemError();
   }
-  if (error) {
-    ::unlink(beside.c_str());
-    return error;
-  }
+  if (auto error = copy.takePlace(to)) return error;
   return ::unlink(from.c_str()) == 0 ? MaybeError() : lastSystemError();
 }
 
@@ -105,12 +87,7 @@ std::string LinuxFileSystem::wellKnownDirectory(platform::WellKnownDirectory whi
 }
 
 MaybeError LinuxFileSystem::createDirectories(std::string_view path, std::uint32_t permissions) {
-  std::size_t end = 0;
-  while (end < path.size()) {
-    end = std::min(path.find('/', end + 1), path.size());
-    if (auto error = createDirectory(std::string(path.substr(0, end)), static_cast<mode_t>(permissions))) return error;
-  }
-  return path.empty() ? systemError(ENOENT) : MaybeError();
+  return linux_host::createDirectories(std::string(path), static_cast<mode_t>(permissions));
 }
 
 MaybeError LinuxFileSystem::createFile(std::string_view path) {
@@ -126,21 +103,9 @@ Outcome<std::unique_ptr<platform::WritableFile>> LinuxFileSystem::openForWriting
 }
 
 Outcome<std::string> LinuxFileSystem::readFile(std::string_view path, std::size_t mostBytes) {
-  // Not blocking, for the case that somebody put a pipe there.
-  const UniqueDescriptor file(::open(std::string(path).c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
-  if (!file) return {{}, lastSystemError()};
-  std::string content;
-  std::string block(kBlockBytes, '\0');
-  for (;;) {
-    const ssize_t got = ::read(file.get(), block.data(), block.size());
-    if (got == 0) return {std::move(content), {}};
-    if (got < 0) {
-      if (errno == EINTR) continue;
-      return {{}, lastSystemError()};
-    }
-    content.append(block, 0, static_cast<std::size_t>(got));
-    if (content.size() > mostBytes) return {{}, systemError(EFBIG)};
-  }
+  auto file = readSmallFile(std::string(path), mostBytes);
+  if (file.failed()) file.value.clear();
+  return file;
 }
 
 bool LinuxFileSystem::exists(std::string_view path) const {

@@ -28,12 +28,12 @@ constexpr int kMaximumTripPoints = 64;
 
 // A kernel file's one line, nothing when it can't be read.
 std::optional<std::string> readLine(const std::string& path) {
-  SmallFile file = readSmallFile(path, kMaximumFactBytes);
-  if (file.error != 0) {
+  auto [line, error] = readSmallFile(path, kMaximumFactBytes);
+  if (error) {
     return std::nullopt;
   }
-  file.content.resize(std::min(file.content.find('\n'), file.content.size()));
-  return std::move(file.content);
+  line.resize(std::min(line.find('\n'), line.size()));
+  return std::move(line);
 }
 
 std::optional<std::int64_t> readNumber(const std::string& path) {
@@ -71,8 +71,8 @@ std::string executableName(const std::string& processFolder) {
 }
 
 std::string firstArgumentName(const std::string& processFolder) {
-  const SmallFile arguments = readSmallFile(processFolder + "/cmdline", kMaximumFactBytes);
-  return std::string(baseName(std::string_view(arguments.content).substr(0, arguments.content.find('\0'))));
+  const std::string arguments = readSmallFile(processFolder + "/cmdline", kMaximumFactBytes).value;
+  return std::string(baseName(std::string_view(arguments).substr(0, arguments.find('\0'))));
 }
 
 // The bytes behind "NAME:" in /proc/self/status, where they are told in kB.
@@ -152,11 +152,11 @@ std::optional<std::string> LinuxProcessFacts::processName(std::int32_t processId
     return std::nullopt;
   }
   const std::string folder = procRoot_ + "/" + std::to_string(processIdentifier);
-  SmallFile comm = readSmallFile(folder + "/comm", kMaximumFactBytes);
-  if (comm.error != 0) {
+  auto [name, error] = readSmallFile(folder + "/comm", kMaximumFactBytes);
+  if (error) {
     return std::nullopt;
   }
-  std::string name = std::move(comm.content);  // may itself hold line ends; the kernel adds one behind
+  // It may itself hold line ends; the kernel adds one after it.
   if (name.ends_with('\n')) {
     name.pop_back();
   }
@@ -173,12 +173,12 @@ std::optional<std::string> LinuxProcessFacts::processName(std::int32_t processId
 
 platform::ProcessFacts::Footprint LinuxProcessFacts::physicalFootprint() const {
   const std::string path = procRoot_ + "/self/status";
-  const SmallFile status = readSmallFile(path, kMaximumFactBytes);
-  if (status.error != 0) {
-    return {std::nullopt, path + errorSuffix(status.error)};
+  const auto [status, error] = readSmallFile(path, kMaximumFactBytes);
+  if (error) {
+    return {std::nullopt, path + errorSuffix(*error)};
   }
-  const std::optional<std::uint64_t> anonymous = statusBytes(status.content, "RssAnon");
-  const std::optional<std::uint64_t> swapped = statusBytes(status.content, "VmSwap");
+  const std::optional<std::uint64_t> anonymous = statusBytes(status, "RssAnon");
+  const std::optional<std::uint64_t> swapped = statusBytes(status, "VmSwap");
   if (!anonymous || !swapped) {
     return {std::nullopt, path + ": no " + (anonymous ? "VmSwap" : "RssAnon")};
   }

@@ -227,11 +227,11 @@ ReadConfiguration parseConfiguration(std::string_view text, std::string_view nam
 }
 
 ReadConfiguration readConfiguration(const std::string& path) {
-  const SmallFile file = readSmallFile(path, kMaximumFileBytes);
-  if (file.error != 0) {
-    return {std::nullopt, path + errorSuffix(file.error)};
+  const auto file = readSmallFile(path, kMaximumFileBytes);
+  if (file.failed()) {
+    return {std::nullopt, path + errorSuffix(*file.error)};
   }
-  return parseConfiguration(file.content, path);
+  return parseConfiguration(file.value, path);
 }
 
 }  // namespace tarn::linux_host

@@ -11,6 +11,8 @@
 #include "host/log/HostLog.h"
 #include "host/settings/StateFolder.h"
 #include "host/system/FileLock.h"
+#include "host/system/FileReplacement.h"
+#include "host/system/Files.h"
 #include "host/system/JsonValues.h"
 #include "host/system/SmallFile.h"
 
@@ -92,8 +94,8 @@ std::string JsonDefaultsStore::store(std::string_view suiteName, std::string_vie
     return "\"" + std::string(suiteName) + "\" can't name a suite";
   }
   const std::string path = pathOf(suiteName);
-  if (const int error = makeFolder(folder_, kFolderMode); error != 0) {
-    return folder_ + errorSuffix(error);
+  if (const auto error = createDirectories(folder_, kFolderMode)) {
+    return folder_ + errorSuffix(*error);
   }
   FileLock writers;
   if (const int error = writers.take(folder_ + "/.lock", lockPatience_); error != 0) {
@@ -116,8 +118,8 @@ std::string JsonDefaultsStore::store(std::string_view suiteName, std::string_vie
   if (text->size() > kMaximumFileBytes) {
     return path + " would be larger than " + std::to_string(kMaximumFileBytes) + " bytes";
   }
-  const int error = replaceFile(path, folder_ + "/." + std::string(suiteName) + ".tmp", *text);
-  return error == 0 ? std::string() : path + errorSuffix(error);
+  const auto error = replaceFile(path, folder_ + "/." + std::string(suiteName) + ".tmp", *text);
+  return error ? path + errorSuffix(*error) : std::string();
 }
 
 std::string JsonDefaultsStore::pathOf(std::string_view suiteName) const {
@@ -148,12 +150,12 @@ JsonDefaultsStore::Suite JsonDefaultsStore::read(const std::string& path, Stamp&
     return error == ENOENT ? Suite() : Suite{{}, path + errorSuffix(error)};
   }
   stamp = stampOf(::fstat(file.get(), &facts), facts);
-  const SmallFile content = readSmallFile(file.get(), kMaximumFileBytes);
-  if (content.error != 0) {
-    return {{}, path + errorSuffix(content.error)};
+  const auto content = readSmallFile(file.get(), kMaximumFileBytes);
+  if (content.failed()) {
+    return {{}, path + errorSuffix(*content.error)};
   }
   Suite suite;
-  suite.fault = parsed(path, content.content, suite.values);
+  suite.fault = parsed(path, content.value, suite.values);
   return suite;
 }
 

@@ -21,11 +21,11 @@ constexpr std::array<std::string_view, 2> kKnown{"InternalBuild", "haptics"};
 JsonDeviceProperties::JsonDeviceProperties() : properties_{{"InternalBuild", false}, {"haptics", false}} {}
 
 std::string JsonDeviceProperties::load(const std::string& path) {
-  const SmallFile file = readSmallFile(path, kMaximumFileBytes);
-  if (file.error != 0) {
-    return path + errorSuffix(file.error);
+  const auto file = readSmallFile(path, kMaximumFileBytes);
+  if (file.failed()) {
+    return path + errorSuffix(*file.error);
   }
-  const JsonReading reading = readJson(file.content);
+  const JsonReading reading = readJson(file.value);
   if (reading.fault) {
     return path + ":" + reading.fault->description();
   }

@@ -6,6 +6,7 @@
 #include <string_view>
 
 #include "host/system/FileLock.h"
+#include "host/system/Files.h"
 
 namespace tarn::linux_host {
 
@@ -15,15 +16,6 @@ bool isPlainName(std::string_view name) noexcept;
 
 // Makes a folder, and those above it, with this mode; 0 when it is there now, or an errno value.
 int makeFolder(const std::string& path, unsigned mode);
-
-// When root works on the state of a service that runs as another user, a file that root made new goes to the owner of
-// the folder that it lies in, or the service couldn't read it. For others nothing happens.
-void giveToFolderOwner(int descriptor, const std::string& folder) noexcept;
-
-// Replaces a file whole: the content goes to `temporary` in the same folder, to the disk, and under the file's name. A
-// file that was there hands down its mode and, from root's hands, its owner. Whoever reads sees the old content or the
-// new. 0 or an errno value.
-int replaceFile(const std::string& path, const std::string& temporary, std::string_view content);
 
 // Makes the state directory (mode 0750) and checks that it can be used; empty, or what is wrong, with the path.
 std::string prepareStateDirectory(const std::string& path);

@@ -6,37 +6,40 @@
 #include <iterator>
 #include <memory>
 
+#include "host/system/SystemError.h"
+
 namespace tarn::linux_host {
 
 namespace {
 constexpr std::size_t kMostEntries = 16384;
 }
 
-FolderNames folderNames(const std::string& folder, std::size_t limit,
-                        const std::function<bool(std::string_view)>& isWanted) {
-  FolderNames found;
+platform::Outcome<FolderNames> folderNames(const std::string& folder, std::size_t limit,
+                                           const std::function<bool(std::string_view)>& isWanted) {
+  platform::Outcome<FolderNames> found;
+  auto& [names, complete] = found.value;
   const std::unique_ptr<DIR, int (*)(DIR*)> directory(::opendir(folder.c_str()), &::closedir);
   if (directory == nullptr) {
-    found.error = errno;
+    found.error = lastSystemError();
     return found;
   }
   for (std::size_t seen = 0; seen <= kMostEntries; ++seen) {
     errno = 0;
     const dirent* const entry = ::readdir(directory.get());  // NOLINT(concurrency-mt-unsafe): a stream of our own
     if (entry == nullptr) {
-      found.error = errno;
+      if (errno != 0) found.error = lastSystemError();
       return found;
     }
     if (!isWanted(entry->d_name)) {
       continue;
     }
-    found.names.insert(entry->d_name);
-    if (found.names.size() > limit) {
-      found.names.erase(std::prev(found.names.end()));
-      found.complete = false;
+    names.insert(entry->d_name);
+    if (names.size() > limit) {
+      names.erase(std::prev(names.end()));
+      complete = false;
     }
   }
-  found.complete = false;
+  complete = false;
   return found;
 }
 

@@ -7,17 +7,18 @@
 #include <string>
 #include <string_view>
 
+#include "platform/Outcome.h"
+
 namespace tarn::linux_host {
 
 struct FolderNames {
   std::set<std::string> names;
   bool complete = true;  // false: there are more
-  int error = 0;         // 0 or an errno value
 };
 
 // The first names in their order, at most `limit`, of those that are wanted. A folder with very many entries is not
-// looked at to its end.
-FolderNames folderNames(const std::string& folder, std::size_t limit,
-                        const std::function<bool(std::string_view)>& isWanted);
+// looked at to its end. Beside an error stands what was found before it.
+platform::Outcome<FolderNames> folderNames(const std::string& folder, std::size_t limit,
+                                           const std::function<bool(std::string_view)>& isWanted);
 
 }  // namespace tarn::linux_host

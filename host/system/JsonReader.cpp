@@ -7,7 +7,7 @@
 
 #include "host/system/JsonValues.h"
 #include "plist/PackedBuilder.h"
-#include "plist/formats/Json.h"
+#include "plist/formats/Base64.h"
 
 namespace tarn::linux_host {
 

@@ -15,11 +15,13 @@
 #include <vector>
 
 #include "plist/Value.h"
+#include "plist/formats/Json.h"
 
 namespace tarn::linux_host {
 
-// As deep as a dictionary may be on the wire; the outermost container is level 1.
-constexpr std::size_t kMaximumJsonNesting = 64;
+using plist::JsonLayout;
+using plist::jsonText;
+using plist::kMaximumJsonNesting;
 
 // What is wrong with a JSON text, and where: both counted from 1, the column in bytes, at the end of what was read.
 struct JsonFault {
@@ -46,14 +48,5 @@ enum class JsonNull {
 // Reads a whole text as one value. An object's member given twice is a fault.
 JsonReading readJson(std::string_view text, std::size_t maximumNesting = kMaximumJsonNesting,
                      JsonNull nullMember = JsonNull::Fault);
-
-enum class JsonLayout {
-  OneLine,   // without a line end
-  Indented,  // a member or item a line, two blanks a level, a line end at the end
-};
-
-// The value as JSON text; nothing for what would not read back equal: an absent value, a number that is not finite,
-// text that is not UTF-8, a dictionary that would read as one of the $ forms, nesting beyond the limit.
-std::optional<std::string> jsonText(const plist::ValueView& value, JsonLayout layout = JsonLayout::OneLine);
 
 }  // namespace tarn::linux_host

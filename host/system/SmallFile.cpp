@@ -5,46 +5,48 @@
 #include <unistd.h>
 
 #include <array>
-#include <cerrno>
+#include <utility>
 
+#include "host/system/SystemError.h"
 #include "host/system/UniqueDescriptor.h"
 
 namespace tarn::linux_host {
 
-SmallFile readSmallFile(const std::string& path, std::size_t limit) {
+using platform::Outcome;
+
+Outcome<std::string> readSmallFile(const std::string& path, std::size_t limit) {
   // A pipe of this name must not hold us up.
   const UniqueDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
   if (!file) {
-    return {{}, errno};
+    return {{}, lastSystemError()};
   }
   return readSmallFile(file.get(), limit);
 }
 
-SmallFile readSmallFile(int descriptor, std::size_t limit) {
+Outcome<std::string> readSmallFile(int descriptor, std::size_t limit) {
   struct stat facts {};
   if (::fstat(descriptor, &facts) != 0) {
-    return {{}, errno};
+    return {{}, lastSystemError()};
   }
   if (!S_ISREG(facts.st_mode)) {
-    return {{}, S_ISDIR(facts.st_mode) ? EISDIR : ENODEV};
+    return {{}, systemError(S_ISDIR(facts.st_mode) ? EISDIR : ENODEV)};
   }
-  SmallFile file;
+  std::string content;
   std::array<char, 16384> buffer;
   while (true) {
-    const ssize_t count = ::pread(descriptor, buffer.data(), buffer.size(), static_cast<off_t>(file.content.size()));
+    const ssize_t count = ::pread(descriptor, buffer.data(), buffer.size(), static_cast<off_t>(content.size()));
     if (count == 0) {
-      return file;
+      return {std::move(content), {}};
     }
     if (count < 0) {
       if (errno == EINTR) {
         continue;
       }
-      return {{}, errno};
+      return {{}, lastSystemError()};
     }
-    file.content.append(buffer.data(), static_cast<std::size_t>(count));
-    if (file.content.size() > limit) {
-      file.error = EFBIG;
-      return file;
+    content.append(buffer.data(), static_cast<std::size_t>(count));
+    if (content.size() > limit) {
+      return {std::move(content), systemError(EFBIG)};
     }
   }
 }

@@ -4,17 +4,14 @@
 #include <cstddef>
 #include <string>
 
+#include "platform/Outcome.h"
+
 namespace tarn::linux_host {
 
-struct SmallFile {
-  std::string content;
-  int error = 0;  // 0, an errno value, or EFBIG when there is more than the limit (the content is the beginning)
-};
-
-// Reads at most `limit` bytes. Only a regular file is read (ENODEV for another, which might never end); the kernel's
-// files under /proc and /sys are such.
-SmallFile readSmallFile(const std::string& path, std::size_t limit);
+// Reads the whole content. When there is more than `limit` bytes the error is EFBIG, beside the beginning of it. Only a
+// regular file is read (ENODEV for another, which might never end); the kernel's files under /proc and /sys are such.
+platform::Outcome<std::string> readSmallFile(const std::string& path, std::size_t limit);
 // The same of a file that is open already, from its beginning.
-SmallFile readSmallFile(int descriptor, std::size_t limit);
+platform::Outcome<std::string> readSmallFile(int descriptor, std::size_t limit);
 
 }  // namespace tarn::linux_host

@@ -3,10 +3,10 @@
 #include <fcntl.h>
 #include <unistd.h>
 
-#include <cstdio>
 #include <string>
 #include <utility>
 
+#include "host/system/FileReplacement.h"
 #include "host/system/SystemError.h"
 #include "host/system/UniqueDescriptor.h"
 #include "plist/EscapedText.h"
@@ -45,14 +45,10 @@ class Writer final : public platform::PerfDataWriter {
  public:
   // The file is open under the name `beside`.
   Writer(UniqueDescriptor file, std::string beside, std::string path, std::string_view name, std::int32_t version)
-      : file_(std::move(file)), beside_(std::move(beside)), path_(std::move(path)), text_("{\n  \"name\": ") {
+      : path_(std::move(path)), text_("{\n  \"name\": ") {
+    file_.begin(std::move(file), std::move(beside));
     appendText(text_, name);
     text_ += ",\n  \"results_version\": " + std::to_string(version) + ",\n  \"values\": [";
-  }
-  ~Writer() override {
-    if (file_) {
-      ::unlink(beside_.c_str());
-    }
   }
   Writer(const Writer&) = delete;
   Writer& operator=(const Writer&) = delete;
@@ -91,36 +87,22 @@ class Writer final : public platform::PerfDataWriter {
   }
 
   MaybeError close() override {
-    if (!file_) return systemError(EBADF);
+    if (!file_.isOpen()) return systemError(EBADF);
     endExtension(open_);
     text_ += hasValues_ ? "\n  ],\n  \"extensions\": [" : "],\n  \"extensions\": [";
     text_ += std::exchange(extensions_, {});
     text_ += extensionCount_ > 0 ? "\n  ]\n}\n" : "]\n}\n";
     flush();
-    if (!error_ && ::fsync(file_.get()) != 0) error_ = lastSystemError();
-    file_.reset();
-    if (!error_ && std::rename(beside_.c_str(), path_.c_str()) != 0) error_ = lastSystemError();
-    if (error_) ::unlink(beside_.c_str());
-    return error_;
+    return file_.takePlace(path_);
   }
 
  private:
-  // Behind a failure nothing more is written: behind a gap it would be worth nothing.
   void flush() {
-    std::string_view left = text_;
-    while (!left.empty() && !error_) {
-      const ssize_t written = ::write(file_.get(), left.data(), left.size());
-      if (written >= 0) {
-        left.remove_prefix(static_cast<std::size_t>(written));
-      } else if (errno != EINTR) {
-        error_ = lastSystemError();
-      }
-    }
+    file_.write(text_);
     text_.clear();
   }
 
-  UniqueDescriptor file_;  // none once closed
-  const std::string beside_;
+  FileReplacement file_;
   const std::string path_;
   std::string text_;  // not written yet
   bool hasValues_ = false;
@@ -128,7 +110,6 @@ class Writer final : public platform::PerfDataWriter {
   Extension extensionCount_ = 0;
   Extension open_ = 0;
   bool hasMembers_ = false;  // of the open extension
-  MaybeError error_;         // the first one
 };
 
 }  // namespace

@@ -65,24 +65,20 @@ std::string_view nameOf(SignpostCategory category) noexcept {
 }
 
 std::string threadName(std::int32_t thread) {
-  SmallFile file = readSmallFile("/proc/self/task/" + std::to_string(thread) + "/comm", 64);
-  while (file.content.ends_with('\n')) file.content.pop_back();
-  return file.error != 0 || file.content.empty() ? "thread " + std::to_string(thread) : file.content;
+  auto [name, error] = readSmallFile("/proc/self/task/" + std::to_string(thread) + "/comm", 64);
+  while (name.ends_with('\n')) name.pop_back();
+  return error || name.empty() ? "thread " + std::to_string(thread) : name;
 }
 
 }  // namespace
 
 TraceFile::TraceFile(Facts facts) : facts_(std::move(facts)), process_(::getpid()) {}
 
-TraceFile::~TraceFile() {
-  if (!partialPath_.empty()) ::unlink(partialPath_.c_str());
-}
-
 MaybeError TraceFile::open() {
   std::string path = facts_.directory + "/." + facts_.name + ".partial";
-  file_ = UniqueDescriptor(::open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, kFilePermissions));
-  if (!file_) return lastSystemError();
-  partialPath_ = std::move(path);
+  UniqueDescriptor made(::open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, kFilePermissions));
+  if (!made) return lastSystemError();
+  file_.begin(std::move(made), std::move(path));
   put("{\"traceEvents\":[\n{\"ph\":\"M\",\"pid\":");
   put(std::to_string(process_));
   put(R"(,"name":"process_name","args":{"name":)");
@@ -141,7 +137,7 @@ void TraceFile::writeLost(std::uint64_t count, std::chrono::nanoseconds at) {
 
 MaybeError TraceFile::flush() {
   writeOut();
-  return failure_;
+  return file_.failure();
 }
 
 platform::Outcome<std::string> TraceFile::finish() {
@@ -156,13 +152,9 @@ platform::Outcome<std::string> TraceFile::finish() {
   put(",\"eventsLeftOut\":");
   put(std::to_string(leftOut_));
   put(full_ ? ",\"full\":true}}\n" : ",\"full\":false}}\n");
-  if (auto error = flush()) return {{}, std::move(error)};
-  // Only a file that is whole on the disk may bear the name.
-  if (::fsync(file_.get()) != 0) return {{}, lastSystemError()};
+  writeOut();
   std::string path = facts_.directory + "/" + facts_.name;
-  if (::rename(partialPath_.c_str(), path.c_str()) != 0) return {{}, lastSystemError()};
-  partialPath_.clear();
-  file_.reset();
+  if (auto error = file_.takePlace(path)) return {{}, std::move(error)};
   return {std::move(path), {}};
 }
 
@@ -225,17 +217,8 @@ void TraceFile::put(std::string_view text) {
   if (heldBack_.size() >= kBlockBytes) writeOut();
 }
 
-// Behind the first failure nothing is written any more: behind a gap it would be worse than missing.
 void TraceFile::writeOut() {
-  std::string_view rest = heldBack_;
-  while (!rest.empty() && !failure_) {
-    const ssize_t written = ::write(file_.get(), rest.data(), rest.size());
-    if (written >= 0) {
-      rest.remove_prefix(static_cast<std::size_t>(written));
-    } else if (errno != EINTR) {
-      failure_ = lastSystemError();
-    }
-  }
+  file_.write(heldBack_);
   heldBack_.clear();
 }
 

@@ -16,7 +16,7 @@
 #include <string_view>
 #include <unordered_set>
 
-#include "host/system/UniqueDescriptor.h"
+#include "host/system/FileReplacement.h"
 #include "host/traces/SignpostBuffer.h"
 #include "platform/Outcome.h"
 
@@ -35,7 +35,6 @@ class TraceFile {
   };
 
   explicit TraceFile(Facts facts);
-  ~TraceFile();
   TraceFile(const TraceFile&) = delete;
   TraceFile& operator=(const TraceFile&) = delete;
 
@@ -64,9 +63,7 @@ class TraceFile {
 
   const Facts facts_;
   const std::int32_t process_;
-  UniqueDescriptor file_;
-  std::string partialPath_;  // empty while there is no file of that name
-  platform::MaybeError failure_;
+  FileReplacement file_;
   std::string event_;  // the one that is being formed
   std::string heldBack_;
   std::size_t bytes_ = 0;

@@ -3,10 +3,11 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <ctime>
+#include <cmath>
 #include <utility>
 
 #include "host/log/HostLog.h"
+#include "plist/CalendarDate.h"
 
 namespace tarn::linux_host {
 
@@ -22,12 +23,11 @@ constexpr std::uint32_t kFolderPermissions = 0777;
 
 // "20261120-211717Z-tarnkit-PROCESS-NUMBER.json": no two traces of a device have the same.
 std::string fileName(double epochSeconds, std::uint64_t number) {
-  const auto seconds = static_cast<std::time_t>(epochSeconds);
-  std::tm calendar{};
-  ::gmtime_r(&seconds, &calendar);
-  char time[32];
-  const std::size_t length = std::strftime(time, sizeof time, "%Y%m%d-%H%M%SZ", &calendar);
-  return std::string(time, length) + "-tarnkit-" + std::to_string(::getpid()) + "-" + std::to_string(number) + ".json";
+  std::string name;
+  if (const auto calendar = plist::calendarDate(std::floor(epochSeconds))) {
+    plist::appendCompactDateAndTime(name, *calendar);
+  }
+  return name + "Z-tarnkit-" + std::to_string(::getpid()) + "-" + std::to_string(number) + ".json";
 }
 
 }  // namespace

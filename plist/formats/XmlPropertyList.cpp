@@ -9,7 +9,7 @@
 #include <vector>
 
 #include "plist/PackedBuilder.h"
-#include "plist/formats/Json.h"
+#include "plist/formats/Base64.h"
 #include "plist/formats/XmlScanner.h"
 
 namespace tarn::plist {

@@ -15,6 +15,8 @@
 // by number. The text is UTF-8. A key given twice is a fault. Integers go from -2^63 to 2^64-1.
 #pragma once
 
+#include <optional>
+#include <string>
 #include <string_view>
 
 #include "plist/formats/PropertyList.h"
@@ -22,5 +24,10 @@
 namespace tarn::plist {
 
 PropertyListReading readXmlPropertyList(std::string_view text);
+
+// The value as a document with tab indentation, dates in whole seconds, data in base64 without line breaks. Nothing for
+// an absent value and, at any depth, for what a document can't hold: a text with characters that XML doesn't have, a
+// date outside the years 1 to 9999.
+std::optional<std::string> xmlPropertyList(const ValueView& value);
 
 }  // namespace tarn::plist

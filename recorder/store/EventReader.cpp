@@ -8,10 +8,13 @@
 #include <thread>
 #include <utility>
 
+#include "plist/Hex.h"
 #include "recorder/store/GlobPattern.h"
 #include "recorder/store/Statement.h"
 
 namespace tarn::recorder {
+
+using platform::MaybeError;
 
 namespace {
 
@@ -57,9 +60,8 @@ std::string uriOf(const std::string& path) {
   std::string uri = "file:";
   for (const char c : path) {
     if (c == '%' || c == '?' || c == '#') {
-      constexpr const char* kDigits = "0123456789abcdef";
-      const auto byte = static_cast<unsigned char>(c);
-      uri.append({'%', kDigits[byte >> 4], kDigits[byte & 15]});
+      uri += '%';
+      plist::appendHex(uri, c);
     } else {
       uri.push_back(c);
     }
@@ -104,10 +106,9 @@ bool EventReader::sameFile(const Identity& now) const noexcept {
   return now.there == opened_.there && now.device == opened_.device && now.inode == opened_.inode;
 }
 
-bool EventReader::openAs(const std::string& name, std::string& error) {
+MaybeError EventReader::openAs(const std::string& name) {
   if (connection_.open(name, SQLITE_OPEN_READONLY | SQLITE_OPEN_URI) != SQLITE_OK) {
-    error = connection_.errorText();
-    return false;
+    return lastError();
   }
   sqlite3_busy_timeout(connection_.handle(), kBusyMilliseconds);
   distrust(connection_.handle(), stepsLeft_);
@@ -115,10 +116,9 @@ bool EventReader::openAs(const std::string& name, std::string& error) {
                              matchesGlob, nullptr, nullptr, nullptr);
   // Only the first reading access shows whether the log and its index can be used.
   if (!connection_.integer("SELECT count(*) FROM sqlite_schema")) {
-    error = errorText();
-    return false;
+    return lastError();
   }
-  return true;
+  return {};
 }
 
 void EventReader::setBounds() {
@@ -132,24 +132,27 @@ void EventReader::setBounds() {
   textLeft_ = kTextOfSmallFile + kTextPerByte * bytes;
 }
 
-std::string EventReader::errorText() const {
-  return stepsLeft_ < 0 ? "its tables lead into themselves" : connection_.errorText();
+platform::PlatformError EventReader::lastError() const {
+  return {sqlite3_errcode(connection_.handle()),
+          stepsLeft_ < 0 ? "its tables lead into themselves" : connection_.errorText()};
 }
 
-bool EventReader::open(std::string& error) {
+MaybeError EventReader::open() {
   opened_ = identity();
   asItLies_ = false;
   dataVersion_ = -1;
-  if (openAs(file_.string(), error)) return true;
-  const int code = sqlite3_errcode(connection_.handle()) & 0xFF;
+  MaybeError error = openAs(file_.string());
+  if (!error) return {};
+  const auto code = error->code & 0xFF;
   // No index can be made in a directory that can't be written to. Where there is no log either, nobody writes, and the
   // file alone is all there is.
   if ((code == SQLITE_CANTOPEN || code == SQLITE_READONLY) && !opened_.hasLog) {
     asItLies_ = true;
-    if (openAs(uriOf(file_.string()), error)) return true;
+    error = openAs(uriOf(file_.string()));
+    if (!error) return {};
   }
   connection_.close();
-  return false;
+  return error;
 }
 
 EventReader::Result EventReader::read(const EventQuery& query) {
@@ -161,8 +164,9 @@ EventReader::Result EventReader::read(const EventQuery& query) {
   }
   if (connection_.isOpen() && !sameFile(now)) connection_.close();
   setBounds();
-  std::string error;
-  if (!connection_.isOpen() && !open(error)) return failed(file_.string() + ": " + error);
+  if (!connection_.isOpen()) {
+    if (const auto error = open()) return failed(file_.string() + ": " + error->text);
+  }
   Result result = readOpen(query);
   if (result.status == Status::Failed) connection_.close();
   return result;
@@ -178,7 +182,7 @@ std::int64_t EventReader::startingPoint(std::int64_t after) {
 EventReader::Result EventReader::readOpen(const EventQuery& query) {
   Result result;
   dataVersion_ = connection_.integer("PRAGMA data_version").value_or(-1);
-  if (connection_.run("BEGIN") != SQLITE_OK) return failed(file_.string() + ": " + errorText());
+  if (connection_.run("BEGIN") != SQLITE_OK) return failed(file_.string() + ": " + lastError().text);
   std::int64_t after = query.after;
   const auto tables = connection_.integer(
       "SELECT count(*) FROM sqlite_schema WHERE name = 'events' AND type = 'table' AND rootpage > 0");
@@ -187,23 +191,21 @@ EventReader::Result EventReader::readOpen(const EventQuery& query) {
     return missing(file_.string() + " holds no events yet");
   }
   after = startingPoint(after);
-  std::string error;
-  const bool ok = readRows(query, after, result, error);
+  const auto error = readRows(query, after, result);
   static_cast<void>(connection_.run("ROLLBACK"));
-  if (!ok) return failed(file_.string() + ": " + error);
+  if (error) return failed(file_.string() + ": " + error->text);
   lastRead_ = opened_;
   return result;
 }
 
-bool EventReader::readRows(const EventQuery& query, std::int64_t after, Result& result, std::string& error) {
+MaybeError EventReader::readRows(const EventQuery& query, std::int64_t after, Result& result) {
   std::string sql = "SELECT id, time, backend, name, payload, detail FROM events WHERE id > ?1";
   if (query.backend) sql += " AND backend = ?2";
   if (query.nameGlob) sql += " AND matches_glob(?3, name)";
   sql += " ORDER BY id LIMIT ?4";
   Statement rows;
   if (rows.prepare(connection_.handle(), sql) != SQLITE_OK) {
-    error = errorText();
-    return false;
+    return lastError();
   }
   rows.bind(1, after).bind(4, static_cast<std::int64_t>(query.limit));
   if (query.backend) rows.bind(2, std::string_view(*query.backend));
@@ -212,20 +214,18 @@ bool EventReader::readRows(const EventQuery& query, std::int64_t after, Result& 
   for (; code == SQLITE_ROW; code = rows.step()) {
     for (int column = 2; column < 6; ++column) textLeft_ -= static_cast<std::int64_t>(rows.text(column).size());
     if (textLeft_ < 0) {
-      error = "its rows say more than it holds";
-      return false;
+      return platform::PlatformError{SQLITE_CORRUPT, "its rows say more than it holds"};
     }
     result.rows.push_back({rows.integer(0), rows.real(1), std::string(rows.text(2)), std::string(rows.text(3)),
                            std::string(rows.text(4)), std::string(rows.text(5))});
   }
   if (code != SQLITE_DONE) {
-    error = errorText();
-    return false;
+    return lastError();
   }
   result.more = result.rows.size() == query.limit;
   const std::int64_t last = connection_.integer("SELECT max(id) FROM events").value_or(after);
   result.lookedUpTo = result.more && !result.rows.empty() ? result.rows.back().id : std::max(after, last);
-  return true;
+  return {};
 }
 
 bool EventReader::changed() {

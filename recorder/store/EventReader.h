@@ -14,6 +14,7 @@
 #include <string>
 #include <vector>
 
+#include "platform/Outcome.h"
 #include "recorder/store/Connection.h"
 
 namespace tarn::recorder {
@@ -73,13 +74,13 @@ class EventReader {
   Identity identity() const;
   bool sameFile(const Identity& now) const noexcept;
   bool changed();
-  bool open(std::string& error);
-  bool openAs(const std::string& name, std::string& error);
+  [[nodiscard]] platform::MaybeError open();
+  [[nodiscard]] platform::MaybeError openAs(const std::string& name);
   void setBounds();  // of the read that begins
-  std::string errorText() const;
+  platform::PlatformError lastError() const;
   std::int64_t startingPoint(std::int64_t after);
   Result readOpen(const EventQuery& query);
-  bool readRows(const EventQuery& query, std::int64_t after, Result& result, std::string& error);
+  [[nodiscard]] platform::MaybeError readRows(const EventQuery& query, std::int64_t after, Result& result);
 
   const std::filesystem::path file_;
   Connection connection_;

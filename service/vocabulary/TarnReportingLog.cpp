@@ -6,29 +6,15 @@
 #include <string>
 
 #include "platform/Facilities.h"
+#include "platform/LogPrefix.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
 
 namespace tarn {
 
 namespace {
 
-constexpr std::size_t kModuleWidth = 25;
-constexpr std::size_t kLineWidth = 5;
+constexpr std::size_t kUsualPrefixBytes = 32;
 constexpr std::string_view kSubsystem = "sys.oxbow.tarnkit";
-
-void appendPrefix(std::string& out, std::string_view module, int line) {
-  if (module.size() < kModuleWidth) {
-    out.append(kModuleWidth - module.size(), ' ');
-  }
-  out.append(module);
-  out.push_back(':');
-  const std::string number = std::to_string(line);
-  out.append(number);
-  if (number.size() < kLineWidth) {
-    out.append(kLineWidth - number.size(), ' ');
-  }
-  out.push_back(' ');
-}
 
 void appendHexadecimal(std::string& out, const LogArgument& argument) {
   const std::uint64_t bits = argument.kind() == plist::Kind::Unsigned
@@ -116,9 +102,9 @@ namespace detail {
 void logWrite(const platform::LogCategory& category, LogLevel level, std::string_view module, const LogText& text,
               std::initializer_list<LogArgument> arguments) {
   std::string line;
-  line.reserve(kModuleWidth + kLineWidth + 2 + 2 * text.text.size());
+  line.reserve(kUsualPrefixBytes + 2 * text.text.size());
   if (!module.empty()) {
-    appendPrefix(line, module, text.line);
+    platform::appendLogPrefix(line, module, text.line);
   }
   appendFormatted(line, text.text, arguments);
   shorten(line);

@@ -3,8 +3,8 @@
 #include <array>
 #include <cmath>
 #include <cstdio>
-#include <ctime>
 
+#include "plist/CalendarDate.h"
 #include "plist/EscapedText.h"
 #include "plist/formats/Json.h"
 #include "tools/ctl/Output.h"
@@ -39,14 +39,11 @@ std::string timeText(double epochSeconds) {
     return std::to_string(epochSeconds);
   }
   const auto milliseconds = static_cast<std::int64_t>(std::floor(epochSeconds * 1000));
-  const auto seconds = static_cast<std::time_t>(milliseconds / 1000);
-  std::tm parts{};
-  ::gmtime_r(&seconds, &parts);
-  std::array<char, 32> text{};
-  const std::size_t length = std::strftime(text.data(), text.size(), "%Y-%m-%dT%H:%M:%S", &parts);
+  std::string text;
+  plist::appendDateAndTime(text, *plist::calendarDate(static_cast<double>(milliseconds / 1000)), 'T');
   std::array<char, 8> fraction{};
   std::snprintf(fraction.data(), fraction.size(), ".%03dZ", static_cast<int>(milliseconds % 1000));
-  return std::string(text.data(), length) + fraction.data();
+  return text + fraction.data();
 }
 
 std::string rightAligned(const std::string& text, int width) {

@@ -1,11 +1,10 @@
 #include "tools/ctl/Output.h"
 
-#include <unistd.h>
-
 #include <cerrno>
 #include <cstdio>
-#include <system_error>
 
+#include "host/system/Files.h"
+#include "plist/Hex.h"
 #include "tools/ctl/ExitStatus.h"
 
 namespace tarn::ctl {
@@ -16,24 +15,15 @@ bool Output::line(std::string_view text) {
   }
   buffer_.assign(text);
   buffer_ += '\n';
-  std::string_view rest = buffer_;
-  while (!rest.empty()) {
-    const ssize_t count = ::write(fd_, rest.data(), rest.size());
-    if (count >= 0) {
-      rest.remove_prefix(static_cast<std::size_t>(count));
-    } else if (errno != EINTR) {
-      errorNumber_ = errno;
-      return false;
-    }
-  }
-  return true;
+  failure_ = linux_host::writeAll(fd_, buffer_);
+  return good();
 }
 
 int Output::status() const {
-  if (errorNumber_ == 0 || errorNumber_ == EPIPE) {
+  if (good() || failure_->code == EPIPE) {
     return kSuccess;
   }
-  complain("can't write the results: " + std::generic_category().message(errorNumber_));
+  complain("can't write the results: " + failure_->text);
   return kFailure;
 }
 
@@ -50,7 +40,6 @@ bool isNamed(const std::string& path, std::string_view option) {
 }
 
 std::string printable(std::string_view text) {
-  constexpr std::string_view kDigits = "0123456789abcdef";
   std::string shown;
   shown.reserve(text.size());
   for (const char character : text) {
@@ -59,8 +48,7 @@ std::string printable(std::string_view text) {
       shown += character;
     } else {
       shown += "\\x";
-      shown += kDigits[byte >> 4U];
-      shown += kDigits[byte & 0xFU];
+      plist::appendHex(shown, character);
     }
   }
   return shown;

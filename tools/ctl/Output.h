@@ -7,6 +7,8 @@
 #include <string>
 #include <string_view>
 
+#include "platform/Outcome.h"
+
 namespace tarn::ctl {
 
 class Output {
@@ -19,7 +21,7 @@ class Output {
   // Writes one line now; its line end is added. False once anything could not be written.
   bool line(std::string_view text);
 
-  bool good() const noexcept { return errorNumber_ == 0; }
+  bool good() const noexcept { return !failure_; }
   // The exit status that the output itself asks for: success while it is good, and when the reader simply left; else it
   // complains and says failure.
   int status() const;
@@ -27,7 +29,7 @@ class Output {
  private:
   int fd_;
   std::string buffer_;
-  int errorNumber_ = 0;
+  platform::MaybeError failure_;
 };
 
 // Writes "tarnreportingctl: TEXT" to stderr.

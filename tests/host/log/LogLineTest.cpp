@@ -2,6 +2,8 @@
 
 #include <gtest/gtest.h>
 
+#include "platform/LogPrefix.h"
+
 namespace tarn::linux_host {
 namespace {
 
@@ -20,6 +22,17 @@ TEST(LogLine, TimeRoundsIntoTheNextSecond) {
 
 TEST(LogLine, TimeBeforeTheEpochCountsBackwards) {
   EXPECT_EQ(logTime(-0.25), "1969-12-31T23:59:59.750000Z");
+}
+
+TEST(LogPrefix, ModuleIsFlushRightAndItsLineFlushLeft) {
+  const auto prefix = [](std::string_view module, int line) {
+    std::string text;
+    platform::appendLogPrefix(text, module, line);
+    return text;
+  };
+  EXPECT_EQ(prefix("Recorder", 7), "                 Recorder:7     ");
+  EXPECT_EQ(prefix("ANameOfTwentyFiveLetters_", 12345), "ANameOfTwentyFiveLetters_:12345 ");
+  EXPECT_EQ(prefix("ANameOfTwentySixLetters___", 123456), "ANameOfTwentySixLetters___:123456 ");
 }
 
 TEST(LogLine, HoldsTimeLevelCategoryAndText) {

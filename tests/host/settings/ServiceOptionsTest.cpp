@@ -140,15 +140,5 @@ TEST(StateFolder, StateDirectoryThatCannotBeHeldIsToldWithItsPathAndReason) {
             "state directory " + folder.path("none") + ": No such file or directory");
 }
 
-TEST(StateFolder, ReplacedFileLeavesNoTemporaryBehindEvenWhenItFails) {
-  const TemporaryFolder folder;
-  EXPECT_EQ(replaceFile(folder.path("f"), folder.path(".f.tmp"), "content"), 0);
-  EXPECT_EQ(folder.read("f"), "content");
-  std::filesystem::create_directory(folder.path("taken"));
-  EXPECT_EQ(replaceFile(folder.path("taken"), folder.path(".t.tmp"), "content"), EISDIR);
-  EXPECT_FALSE(std::filesystem::exists(folder.path(".t.tmp")));
-  EXPECT_FALSE(std::filesystem::exists(folder.path(".f.tmp")));
-}
-
 }  // namespace
 }  // namespace tarn::linux_host

@@ -54,16 +54,6 @@ TEST(Json, ContainersKeepTheirOrder) {
   EXPECT_EQ(json(Dictionary{{"b", Array{}}, {"a", Dictionary{{"x", "y"}}}}), R"({"b":[],"a":{"x":"y"}})");
 }
 
-TEST(Json, Base64IsDecodedStrictly) {
-  EXPECT_EQ(decodeBase64(""), "");
-  EXPECT_EQ(decodeBase64("YQ=="), "a");
-  EXPECT_EQ(decodeBase64("YWI="), "ab");
-  EXPECT_EQ(decodeBase64("YWJj"), "abc");
-  for (const char* wrong : {"YQ", "YQ=", "YR==", "Y===", "====", "YQ==YQ==", "Y Q=", "YWJ\n"}) {
-    EXPECT_FALSE(decodeBase64(wrong)) << wrong;
-  }
-}
-
 TEST(Json, AbsentValuesAreNull) {
   EXPECT_EQ(json(ValueView()), "null");
 }

@@ -1,5 +1,3 @@
-#include "plist/formats/PrettyJson.h"
-
 #include <gtest/gtest.h>
 
 #include <cmath>

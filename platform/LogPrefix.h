@@ -1,0 +1,22 @@
+// What every log line begins with: the module, flush right, and the line of its source.
+//
+// Stateless. Threads: any.
+#pragma once
+
+#include <algorithm>
+#include <cstddef>
+#include <string>
+#include <string_view>
+
+namespace tarn::platform {
+
+// Appends "%25s:%-5d ".
+inline void appendLogPrefix(std::string& out, std::string_view module, int line) {
+  constexpr std::size_t kModuleWidth = 25;
+  constexpr std::size_t kLineWidth = 5;
+  out.append(kModuleWidth - std::min(module.size(), kModuleWidth), ' ').append(module).append(":");
+  const std::string number = std::to_string(line);
+  out.append(number).append(kLineWidth - std::min(number.size(), kLineWidth), ' ').append(" ");
+}
+
+}  // namespace tarn::platform

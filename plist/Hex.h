@@ -1,0 +1,20 @@
+// Bytes in hexadecimal, two small digits each. Stateless. Threads: any.
+#pragma once
+
+#include <string>
+#include <string_view>
+
+namespace tarn::plist {
+
+inline void appendHex(std::string& out, char byte) {
+  constexpr std::string_view kDigits = "0123456789abcdef";
+  const auto value = static_cast<unsigned char>(byte);
+  out += kDigits[value >> 4U];
+  out += kDigits[value & 0xFU];
+}
+
+inline void appendHex(std::string& out, std::string_view bytes) {
+  for (const char byte : bytes) appendHex(out, byte);
+}
+
+}  // namespace tarn::plist

@@ -1,0 +1,14 @@
+// Bytes as base64 text (RFC 4648, padded, no line breaks). Stateless. Threads: any.
+#pragma once
+
+#include <optional>
+#include <string>
+#include <string_view>
+
+namespace tarn::plist {
+
+void appendBase64(std::string& out, std::string_view bytes);
+// The bytes of a text; nothing when it is no such text.
+std::optional<std::string> decodeBase64(std::string_view text);
+
+}  // namespace tarn::plist
