@@ -125,7 +125,6 @@ bool RequestPass::readEnd() {
   if (openEnded_) {
     in_.skip(1);  // the break, which the count has seen
   }
-  trouble_ = "bytes behind the array";
   return in_.atEnd();
 }
 

@@ -2,6 +2,7 @@
 
 #include <gtest/gtest.h>
 
+#include "tests/support/HeapUse.h"
 #include "tests/wire/Bytes.h"
 
 namespace tarn::wire {
@@ -35,6 +36,18 @@ TEST(ReplyDecoder, ReadsIDNullAndResults) {
   EXPECT_EQ(outcome.reply.results[0], plist::Value(true));
   EXPECT_EQ(outcome.reply.results[1], plist::Value(plist::Array{1, plist::Array{2, 3}}));
   EXPECT_EQ(outcome.reply.results[2], plist::Value(plist::Dictionary{{"a", 11}}));
+}
+
+TEST(ReplyDecoder, RefusedDictionariesLeaveNoMemoryBehind) {
+  const std::string frame = fromHex("8307f6a2616b01616b02");
+  ReplyDecoder decoder;
+  DecodedReply reply;
+  std::string reason;
+  const testing::HeapGrowth heap;
+  for (int i = 0; i < 20'000; ++i) {
+    ASSERT_FALSE(decoder.decode(asBytes(frame), reply, reason));
+  }
+  EXPECT_LT(heap.bytes(), 16'384);
 }
 
 TEST(ReplyDecoder, ReadsErrors) {

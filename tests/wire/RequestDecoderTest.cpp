@@ -4,6 +4,7 @@
 
 #include <limits>
 
+#include "tests/support/HeapUse.h"
 #include "tests/wire/Bytes.h"
 #include "wire/Encoder.h"
 
@@ -31,6 +32,15 @@ TEST(RequestDecoder, OperationsWithoutArgumentsTakeNone) {
     EXPECT_TRUE(decodeHex(std::string("8207") + number).ok()) << number;
     EXPECT_EQ(decodeHex(std::string("8307") + number + "00").code(), 2) << number;
   }
+}
+
+TEST(RequestDecoder, WhatAnOperationDoesNotTakeIsZero) {
+  const Decoded decoded = decodeHex("82070a");
+  ASSERT_TRUE(decoded.ok());
+  EXPECT_EQ(decoded.request.serviceType, 0);
+  EXPECT_EQ(decoded.request.category, 0U);
+  EXPECT_EQ(decoded.request.type, 0);
+  EXPECT_EQ(decoded.request.reporterID, 0);
 }
 
 TEST(RequestDecoder, SetServiceTypeTakesTheTypeBeforeTheReporterID) {
@@ -257,6 +267,35 @@ TEST(RequestDecoder, WhatIsNotWellFormedIsUnreadableHoweverDeepAndWhateverElseIs
            "84070102fc",                    // behind a wrong count
        }) {
     EXPECT_TRUE(decodeHex(hex).unreadable()) << hex;
+  }
+}
+
+TEST(RequestDecoder, AListThatClaimsMoreThanTheFrameHoldsMakesNoRoom) {
+  EXPECT_TRUE(decodeHex("860706a1616b0501029bffffffffffffffff").unreadable());
+  EXPECT_TRUE(decodeHex("860706a1616b0501029affffffff").unreadable());
+}
+
+TEST(RequestDecoder, ABreakAfterATaggedItemEndsItsArray) {
+  EXPECT_EQ(decodeHex("840704a1616b9fc105ff01").code(), 3);  // readable: lists of open length are just not taken
+}
+
+TEST(RequestDecoder, AKeyGivenTwiceIsCalledSo) {
+  const Decoded decoded = decodeHex("840704a2616b01616b0201");
+  EXPECT_EQ(decoded.code(), 3);
+  EXPECT_EQ(decoded.refusal.text, "setConfiguration: not a property list: a key given twice");
+}
+
+TEST(RequestDecoder, RefusedDictionariesLeaveNoMemoryBehind) {
+  for (const char* hex : {"840704a2616b01616b0201", "840704a1616bf601"}) {
+    const std::string frame = fromHex(hex);
+    RequestDecoder decoder;
+    DecodedRequest request;
+    Refusal refusal;
+    const testing::HeapGrowth heap;
+    for (int i = 0; i < 20'000; ++i) {
+      ASSERT_EQ(decoder.decode(asBytes(frame), request, refusal), DecodeOutcome::Refused);
+    }
+    EXPECT_LT(heap.bytes(), 16'384) << hex;
   }
 }
 
