@@ -165,12 +165,10 @@ void TarnReportingClientServerInstance::reporterID(std::int64_t reporterID, plat
   onServerQueue([self = shared_from_this(), reporterID, reply = std::move(reply)]() mutable {
     const auto signpost = operation("reporterID", {"reporterID", reporterID});
     kLog(LogLevel::Default, "validating reporter %lli", reporterID);
-    plist::Dictionary answer{{"reporterID", 0}, {"serviceType", static_cast<int>(AudioServiceType::Unknown)}};
-    if (const auto session = self->findReportingSessionForID(reporterID, true)) {
-      answer.set("reporterID", reporterID);
-      answer.set("serviceType", static_cast<int>(session->serviceType()));
-    }
-    reply(std::nullopt, std::move(answer));
+    const auto session = self->findReportingSessionForID(reporterID, true);
+    const auto type = session ? session->serviceType() : AudioServiceType::Unknown;
+    reply(std::nullopt,
+          plist::Dictionary{{"reporterID", session ? reporterID : 0}, {"serviceType", static_cast<int>(type)}});
   });
 }
 
@@ -329,7 +327,6 @@ void TarnReportingClientServerInstance::send(plist::Dictionary message, std::uin
 }
 
 void TarnReportingClientServerInstance::endClient() {
-  TarnReportingRequireServerQueue();
   const auto service = delegate_.lock();
   if (!service) {
     return;

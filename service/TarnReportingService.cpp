@@ -165,7 +165,7 @@ TarnReportingService::Sessions TarnReportingService::findReportingSessionsForIDs
   if (reporterIDs && !reporterIDs->empty()) {
     Sessions found;
     for (const std::int64_t reporterID : *reporterIDs) {
-      if (auto session = reporterID == 0 ? nullptr : findReportingSessionForID(reporterID)) {
+      if (auto session = findReportingSessionForID(reporterID)) {
         found.push_back(std::move(session));
       }
     }
@@ -203,7 +203,6 @@ std::size_t TarnReportingService::sessionCount() const {
 }
 
 std::shared_ptr<TarnReportingSession> TarnReportingService::retrieveSingleMessageSession() {
-  TarnReportingRequireServerQueue();
   singleMessageSessionLastRetrieved_ = TarnReportingFacilities().clock.monotonic();
   if (!singleMessageSession_) {
     kLog(LogLevel::Default, "Creating singleMessageSession");
@@ -230,7 +229,6 @@ void TarnReportingService::queueStopSingleSession(std::chrono::nanoseconds delay
 }
 
 void TarnReportingService::checkSingleSession() {
-  TarnReportingRequireServerQueue();
   const std::chrono::duration<double> idle =
       TarnReportingFacilities().clock.monotonic() - singleMessageSessionLastRetrieved_;
   if (idle > kTimeout) {

@@ -23,7 +23,10 @@ class FakeConnection final : public platform::Connection, public std::enable_sha
   void setExportedObject(std::shared_ptr<platform::TarnReportingServiceProtocol> object) override;
   void setInterruptionHandler(Handler handler) override;
   void setInvalidationHandler(Handler handler) override;
-  void resume() override { resumed_ = true; }
+  void resume() override {
+    resumed_ = true;
+    wasWholeAtResume_ = exportedObject_ && interruptionHandler_ && invalidationHandler_;
+  }
 
   // Controls.
   // Breaks the connection; invalidate() is left to the test.
@@ -37,6 +40,8 @@ class FakeConnection final : public platform::Connection, public std::enable_sha
     return exportedObject_;
   }
   bool resumed() const noexcept { return resumed_; }
+  // Whether the exported object and both handlers were there when it was resumed: what comes after would miss them.
+  bool wasWholeAtResume() const noexcept { return wasWholeAtResume_; }
   bool invalidated() const noexcept { return invalidated_; }
 
  private:
@@ -45,6 +50,7 @@ class FakeConnection final : public platform::Connection, public std::enable_sha
   Handler interruptionHandler_;
   Handler invalidationHandler_;
   bool resumed_ = false;
+  bool wasWholeAtResume_ = false;
   bool invalidated_ = false;
 };
 

@@ -2,7 +2,9 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <mutex>
+#include <utility>
 #include <vector>
 
 #include "platform/TracePoints.h"
@@ -21,9 +23,15 @@ class FakeTracePoints final : public platform::TracePoints {
   void emit(std::uint32_t code, std::int64_t argument) noexcept override {
     const std::lock_guard lock(mutex_);
     emitted_.push_back({code, argument});
+    if (onEmit_) onEmit_();
   }
 
   // Controls.
+  // Called with each point, under the lock of these points.
+  void onEmit(std::function<void()> call) {
+    const std::lock_guard lock(mutex_);
+    onEmit_ = std::move(call);
+  }
   void clear() {
     const std::lock_guard lock(mutex_);
     emitted_.clear();
@@ -37,7 +45,8 @@ class FakeTracePoints final : public platform::TracePoints {
 
  private:
   mutable std::mutex mutex_;
-  std::vector<Point> emitted_;  // guarded by mutex_
+  std::vector<Point> emitted_;    // guarded by mutex_
+  std::function<void()> onEmit_;  // guarded by mutex_
 };
 
 }  // namespace tarn::testing

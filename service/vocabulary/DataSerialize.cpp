@@ -13,7 +13,7 @@ std::optional<std::string> DataSerialize::getPlistBlob(const plist::ValueView& v
 
 std::optional<std::string> DataSerialize::getXMLInfo(const plist::ValueView& value) {
   auto xml = getPlistBlob(value);
-  const auto isAscii = [](char character) { return static_cast<unsigned char>(character) < 0x80; };
+  const auto isAscii = [](char character) { return (static_cast<unsigned char>(character) & 0x80U) == 0; };
   if (xml && !std::all_of(xml->begin(), xml->end(), isAscii)) {
     return std::nullopt;
   }

@@ -32,32 +32,24 @@ void appendSixDecimals(std::string& out, double value) {
 }
 
 void appendArgument(std::string& out, char conversion, const LogArgument& argument) {
-  switch (argument.kind()) {
-    case plist::Kind::Bool:
-    case plist::Kind::Signed:
-    case plist::Kind::Unsigned:
-      if (conversion == 'x') {
-        return appendHexadecimal(out, argument);
-      }
-      break;
-    case plist::Kind::Float:
-    case plist::Kind::Double:
-      if (conversion == 'f') {
-        return appendSixDecimals(out, argument.asDouble());
-      }
-      break;
-    default:
-      break;
+  const plist::Kind kind = argument.kind();
+  const bool isWhole = kind == plist::Kind::Bool || kind == plist::Kind::Signed || kind == plist::Kind::Unsigned;
+  const bool isFloating = kind == plist::Kind::Float || kind == plist::Kind::Double;
+  if (conversion == 'x' && isWhole) {
+    appendHexadecimal(out, argument);
+  } else if (conversion == 'f' && isFloating) {
+    appendSixDecimals(out, argument.asDouble());
+  } else {
+    plist::appendDescription(out, argument);
   }
-  plist::appendDescription(out, argument);
 }
 
 // The length of the conversion that begins at the percent sign in front of `text`, 0 when it is none: letters that tell
 // a width in bits, then the letter of the conversion.
 std::size_t conversionLength(std::string_view text) {
-  const std::size_t letter = std::min(text.find_first_not_of("hljtqz"), text.size());
+  const std::size_t letter = text.find_first_not_of("hljtqz");
   const bool isConversion =
-      letter < text.size() && std::string_view("@sidufx").find(text[letter]) != std::string_view::npos;
+      letter != std::string_view::npos && std::string_view("@sidufx").find(text[letter]) != std::string_view::npos;
   return isConversion ? letter + 1 : 0;
 }
 

@@ -75,8 +75,8 @@ void roundDecimals(std::string& digits, std::size_t places) {
   }
   const std::string dropped = digits.substr(places == 0 ? point + 1 : keep);
   digits.resize(keep);
-  const bool isHalf = dropped[0] == '5' && dropped.find_first_not_of('0', 1) == std::string::npos;
-  const bool lastIsOdd = (digits.back() - '0') % 2 == 1;
+  const bool isHalf = dropped == "5";             // the shortest digits end in no zeros
+  const bool lastIsOdd = digits.back() % 2 == 1;  // as its character is
   if (isHalf ? lastIsOdd : dropped[0] >= '5') {
     incrementLastDigit(digits);
   }
@@ -176,15 +176,12 @@ std::optional<std::string> TarnReportingUtilityBucketNumberToString(double numbe
   if (buckets.empty()) {
     return std::nullopt;
   }
-  double best = 0;
-  double bestDistance = -1;
+  double best = buckets.front();
   for (const double bucket : buckets) {
-    const double distance = std::abs(number - bucket);
-    if (bestDistance >= 0 && distance > bestDistance) {
+    if (std::abs(number - bucket) > std::abs(number - best)) {
       break;
     }
     best = bucket;
-    bestDistance = distance;
   }
   const std::size_t least = places == 0 ? 0 : 1;
   // A formatter never shows fewer decimals at most than at least.

@@ -71,7 +71,6 @@ const std::unordered_map<std::string_view, AudioEventCategory>& categoriesByName
     for (std::size_t value = 1; value <= static_cast<std::size_t>(AudioEventCategory::HearingHealth); ++value) {
       categories.emplace(kCategoryNames[value], static_cast<AudioEventCategory>(value));
     }
-    categories.emplace("Unknown", AudioEventCategory::Unknown);
     return categories;
   }();
   return kTable;

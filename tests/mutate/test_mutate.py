@@ -50,6 +50,10 @@ class Project(unittest.TestCase):
         self.assertRegex(self.told, r"(?m)^new +survived +#\d+ sums/Sums\.cpp:12: a < b -> a <= b$")
         self.assertRegex(self.told, r"Sums\.cpp:\d+: made\.reserve\(7\); left out")
 
+    def test_what_only_a_death_test_comes_by_is_caught(self):
+        self.assertIn(": std::abort(); left out\n", self.listed)
+        self.assertNotIn("std::abort(); left out", self.told)
+
     def test_what_no_test_comes_by_is_told(self):
         self.assertRegex(self.told, r"(?m)^new +not reached +#\d+ sums/Sums\.cpp:32: number \* 3 -> number / 3$")
 

@@ -143,6 +143,15 @@ TEST_F(LogLines, Destroy) {
   EXPECT_EQ(take(kClient), (Lines{"default destroying session for reporter 0", "default destroying 0"}));
 }
 
+TEST_F(LogLines, DestroyIsToldBeforeTheListOfWhatRuns) {
+  create(client_, 10);
+  platform_.log.clear();
+  destroy(client_, 10);
+  EXPECT_EQ(platform_.log.messages(),
+            (Lines{"destroying session for reporter 10", "deallocing this session 10", "destroying 10",
+                   "sessions for client 41 : ()", "0 active reporting session(s) ()"}));
+}
+
 TEST_F(LogLines, Questions) {
   Answer<plist::Dictionary> reporter;
   client_.remote().reporterID(10, reporter.reply());

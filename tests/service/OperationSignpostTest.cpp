@@ -33,10 +33,23 @@ TEST_F(OperationSignpost, EachOperationIsOneInterval) {
   client.remote().killService();
   platform_.runUntilIdle();
 
-  for (const char* name : {"createReportingSession", "setServiceType", "setConfiguration", "startReportingSessionForID",
-                           "sendMessage", "getServiceNameForReporterID", "stopReportingSessionForID",
-                           "destroyReportingSession", "reporterID", "getAllReporters", "killService"}) {
+  const std::pair<std::string, std::string> expected[] = {{"createReportingSession", "reporterID=7"},
+                                                          {"setServiceType", "reporterID=7"},
+                                                          {"setConfiguration", "reporterID=7"},
+                                                          {"startReportingSessionForID", "reporterID=7"},
+                                                          {"sendMessage", "category=4"},
+                                                          {"getServiceNameForReporterID", "reporterID=7"},
+                                                          {"stopReportingSessionForID", "reporterID=7"},
+                                                          {"destroyReportingSession", "reporterID=7"},
+                                                          {"reporterID", "reporterID=7"},
+                                                          {"getAllReporters", ""},
+                                                          {"killService", ""}};
+  const auto intervals = platform_.signposts.intervals();
+  for (const auto& [name, argument] : expected) {
     EXPECT_EQ(operations(name), 1U) << name;
+    const FakeSignposts::Post post{platform::SignpostCategory::Operation, "TarnReportingClientServerInstance." + name,
+                                   argument};
+    EXPECT_EQ(std::count(intervals.begin(), intervals.end(), post), 1) << name;
   }
 }
 

@@ -7,6 +7,18 @@ namespace {
 using namespace testing;
 using namespace std::chrono_literals;
 
+// Writes the configuration that it finds when its session starts, and applies to none.
+struct ConfigurationTeller : TarnReportingSessionWorkerProtocol {
+  static constexpr std::string_view kClassName = "ConfigurationTeller";
+  static std::unique_ptr<ConfigurationTeller> initWithSession(const std::shared_ptr<TarnReportingSession>& session) {
+    TarnReportingLog(TarnReportingSessionCategory(), LogLevel::Default, kClassName, "found %@",
+                     session->configuration());
+    return nullptr;
+  }
+  static bool handleSingleMessageSession() { return true; }
+};
+constexpr TarnReportingSessionWorkerClass kTellers[] = {TarnReportingSessionWorkerClass::of<ConfigurationTeller>()};
+
 class SingleMessageSession : public ServiceFixture {
  protected:
   // Uses the session and returns it.
@@ -45,6 +57,12 @@ TEST_F(SingleMessageSession, IsTypedAndConfiguredBeforeItStarts) {
     }
   }
   EXPECT_EQ(order, (std::vector<std::string>{"setting service type standalone", "start called. reporterID=1"}));
+}
+
+TEST_F(SingleMessageSession, IsConfiguredWhenItsWorkersStart) {
+  TarnReportingSession::setAllWorkerClasses(kTellers);
+  use();
+  EXPECT_TRUE(platform_.log.contains("found {HostApplicationDisplayID = Unknown}"));
 }
 
 TEST_F(SingleMessageSession, IsInNoClientsListAndFoundUnderNoID) {

@@ -382,6 +382,42 @@ TEST_F(RemoteOperations, KillServiceEndsTheProcessWithStatusTwo) {
   EXPECT_TRUE(platform_.log.contains("DESTROYING SERVICE"));
 }
 
+TEST_F(RemoteOperations, KillServiceSaysSoBeforeTheProcessEnds) {
+  std::vector<std::string> told;
+  platform_.processControl.onExit([&] { told = platform_.log.messages(); });
+  client_.remote().killService();
+  platform_.runUntilIdle();
+  ASSERT_FALSE(told.empty());
+  EXPECT_EQ(told.back(), "DESTROYING SERVICE");
+}
+
+TEST_F(RemoteOperations, HeldReplyIsSentBeforeTheSessionsThatRunAreListed) {
+  create(client_, 10);
+  int count = 0;
+  std::size_t listed = 0;
+  client_.remote().startReportingSessionForID(10, [&](const std::optional<platform::RemoteError>&, bool) {
+    ++count;
+    listed = platform_.log.count("active reporting session(s)");
+  });
+  platform_.runUntilIdle();
+  platform_.log.clear();
+  stop(client_, 10);
+  EXPECT_EQ(count, 1);
+  EXPECT_EQ(listed, 0U);
+  EXPECT_EQ(platform_.log.count("active reporting session(s)"), 1U);
+}
+
+TEST_F(RemoteOperations, LossAfterTheServicesEndStopsNothing) {
+  create(client_, 10);
+  start(client_, 10, held_);
+  const auto session = sessionOf(0, 10);
+  service_.reset();
+  client_.connection->interrupt();
+  platform_.runUntilIdle();
+  EXPECT_TRUE(session->started());
+  EXPECT_FALSE(platform_.log.contains("removing 41 from the server client list"));
+}
+
 TEST_F(RemoteOperations, RequestsAreServedInTheOrderOfArrival) {
   Answer<bool> created;
   Answer<std::uint16_t> type;
@@ -431,6 +467,7 @@ TEST_F(InternalBuildOperations, StartOfATestSessionIsAnsweredAtOnceAndAtTheStop)
   retype(client, 11, 10);
   start(client, 10, held);
   EXPECT_EQ(held.count, 1);
+  EXPECT_TRUE(held.result);
   stop(client, 10);
   EXPECT_EQ(held.count, 2);  // the connection drops the second
 }

@@ -1,6 +1,7 @@
 #include "service/TarnReportingService.h"
 
 #include "derived/TarnReportingSystemMonitor.h"
+#include "platform/WorkQueue.h"
 #include "tests/service/ServiceFixture.h"
 
 namespace tarn {
@@ -13,6 +14,13 @@ class TarnReportingServiceTest : public ServiceFixture {
  protected:
   static constexpr const char* kPlaybackStart = "sys.oxbow.tarnkit.Playback.Start";
   static constexpr const char* kUptime = "sys.oxbow.tarnkit.tarnreportingclientuptime";
+  static constexpr const char* kOutside = "tarnkit: code of the server queue was called outside it";
+
+  // As work of a queue that isn't the server's.
+  void runElsewhere(platform::Work work) {
+    platform_.workQueues.makeSerialQueue("elsewhere", platform::QualityOfService::Utility)->async(std::move(work));
+    platform_.runUntilIdle();
+  }
 };
 
 TEST_F(TarnReportingServiceTest, StartsTheSystemMonitor) {
@@ -25,6 +33,7 @@ TEST_F(TarnReportingServiceTest, AcceptsAConnectionAndListsItsClient) {
   const auto connection = platform_.listener.connect(41);
   ASSERT_TRUE(connection != nullptr);
   EXPECT_TRUE(connection->resumed());
+  EXPECT_TRUE(connection->wasWholeAtResume());
   EXPECT_TRUE(service_->getAllClients().empty());  // the client is listed by work on the queue
   platform_.runUntilIdle();
   ASSERT_EQ(service_->getAllClients().size(), 1U);
@@ -229,6 +238,28 @@ TEST_F(TarnReportingServiceTest, UptimeOfAClientThatWasNeverListedIsMinusOne) {
   EXPECT_EQ(events(kUptime), 0U);
   platform_.runUntilIdle();
   EXPECT_TRUE(service_->getAllClients().empty());
+}
+
+TEST_F(TarnReportingServiceTest, InvalidationAfterTheEndOfTheClientTellsNothing) {
+  const Client client = connect(41);
+  client.connection->interrupt();
+  platform_.runUntilIdle();
+  client.connection->setExportedObject(nullptr);  // its last owner
+  platform_.log.clear();
+  client.connection->invalidate();
+  platform_.runUntilIdle();
+  EXPECT_TRUE(platform_.log.messages().empty());
+  EXPECT_EQ(events(kUptime), 0U);
+}
+
+TEST_F(TarnReportingServiceTest, ListOfActiveSessionsIsForTheServerQueueAlone) {
+  EXPECT_DEATH(runElsewhere([this] { service_->getAllActiveReportingSessions(); }), kOutside);
+}
+
+TEST_F(TarnReportingServiceTest, SessionsOfAClientAreForTheServerQueueAlone) {
+  connect(41);
+  const auto client = service_->getAllClients().at(0);
+  EXPECT_DEATH(runElsewhere([&] { client->findReportingSessionForID(10, false); }), kOutside);
 }
 
 TEST_F(TarnReportingServiceTest, InterruptionAndInvalidationEndTheClientOnce) {

@@ -86,6 +86,21 @@ TEST_F(OperationTracePoints, StopIsMarkedBeforeTheSessionStopsAndThatBeforeItsSu
   EXPECT_EQ(take(), (Points{{0x2104481C, 10}, {0x2104481C, 0}}));
 }
 
+TEST_F(OperationTracePoints, EachIsMarkedAfterTheLineThatTellsOfTheRequest) {
+  std::vector<std::string> told;
+  platform_.tracePoints.onEmit([&] { told.push_back(platform_.log.messages().back()); });
+  const auto takeFirst = [&] { return std::exchange(told, {}).at(0); };
+  create(client_, 10);
+  EXPECT_EQ(takeFirst(), "creating session for reporter 10");
+  start(client_, 10, held_);
+  EXPECT_EQ(takeFirst(), "starting session for reporter 10");
+  send(client_, {{"a", 1}}, std::vector<std::int64_t>{10});
+  EXPECT_EQ(takeFirst(), "sending message for reporter (10)");
+  stop(client_, 10);
+  EXPECT_EQ(takeFirst(), "stopping session for reporter 10");
+  platform_.tracePoints.onEmit({});
+}
+
 TEST_F(OperationTracePoints, OtherOperationsSetNone) {
   create(client_, 10);
   take();

@@ -3,6 +3,7 @@
 #include "tools/mutate/selector.h"
 
 #include <gtest/gtest.h>
+#include <sys/mman.h>
 
 #include <charconv>
 #include <cstdlib>
@@ -10,14 +11,22 @@
 #include <fstream>
 #include <memory>
 
+namespace {
+constexpr std::size_t kMostMutants = 65536;
+unsigned char own[kMostMutants];
+}  // namespace
+
 extern "C" {
 int tarn_mutant_chosen = 0;
-unsigned char tarn_mutant_reached[65536];
+unsigned char* tarn_mutant_reached = own;
 }
 
 namespace {
 
 __attribute__((constructor(101))) void choose() {
+  // A death test comes by its mutants in a child of this process, so the memory is shared with it.
+  void* const shared = mmap(nullptr, kMostMutants, PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0);
+  if (shared != MAP_FAILED) tarn_mutant_reached = static_cast<unsigned char*>(shared);
   const char* const id = std::getenv("TARN_MUTANT");
   if (id != nullptr) std::from_chars(id, id + std::strlen(id), tarn_mutant_chosen);
 }
@@ -31,14 +40,14 @@ class Reached final : public ::testing::EmptyTestEventListener {
     // What is reached between tests, as in the initialisation of the program, counts for all of them.
     if (!started_) tell("*", 0);
     started_ = true;
-    std::memset(tarn_mutant_reached, 0, sizeof tarn_mutant_reached);
+    std::memset(tarn_mutant_reached, 0, kMostMutants);
   }
   void OnTestEnd(const ::testing::TestInfo& info) override {
     tell(std::string(info.test_suite_name()) + "." + info.name(), info.result()->elapsed_time());
   }
   void tell(const std::string& test, long long milliseconds) {
     out_ << test << ' ' << milliseconds;
-    for (std::size_t id = 0; id < sizeof tarn_mutant_reached; ++id) {
+    for (std::size_t id = 0; id < kMostMutants; ++id) {
       if (tarn_mutant_reached[id] != 0) out_ << ' ' << id;
     }
     out_ << '\n' << std::flush;

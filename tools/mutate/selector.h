@@ -2,8 +2,8 @@
 #pragma once
 
 extern "C" {
-extern int tarn_mutant_chosen;                    // 0: none
-extern unsigned char tarn_mutant_reached[65536];  // which were asked about
+extern int tarn_mutant_chosen;              // 0: none
+extern unsigned char* tarn_mutant_reached;  // which were asked about, here or in a child process
 }
 
 inline bool tarn_mutant_is(int id) {

@@ -2,16 +2,21 @@
 
 #include <gtest/gtest.h>
 
+#include <csignal>
+#include <memory>
 #include <string>
 #include <thread>
 #include <vector>
 
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
+#include "service/vocabulary/TarnReportingUtility.h"
 #include "testing/FakePlatform.h"
 
 namespace tarn {
 namespace {
+
+constexpr const char* kNotInstalled = "tarnkit: the platform's facilities are not installed";
 
 // Each says so in the log when it goes.
 struct First {
@@ -24,6 +29,12 @@ struct Second {
 // Asks for another one when it goes.
 struct Asking {
   ~Asking() { ++ProcessState::of<First>()->count; }
+};
+// Tells whether the server's queue was gone before it.
+struct Witness {
+  ~Witness() { *queueWasGone = queue.expired(); }
+  std::weak_ptr<platform::WorkQueue> queue;
+  bool* queueWasGone = nullptr;
 };
 
 class ProcessStateTest : public ::testing::Test {
@@ -72,6 +83,22 @@ TEST_F(ProcessStateTest, AStateThatIsAskedForAtTheEndGoesToo) {
   EXPECT_EQ(gone(), (std::vector<std::string>{"first goes"}));
 }
 
+TEST_F(ProcessStateTest, TheServerQueueGoesBeforeTheStates) {
+  bool queueWasGone = false;
+  {
+    const auto witness = ProcessState::of<Witness>();
+    witness->queue = TarnReportingUtilityGetReportingServerQueue();
+    witness->queueWasGone = &queueWasGone;
+  }
+  TarnReportingInstallFacilities(nullptr);
+  EXPECT_TRUE(queueWasGone);
+}
+
+TEST_F(ProcessStateTest, WithTheFacilitiesTakenAwayThereIsNone) {
+  TarnReportingInstallFacilities(nullptr);
+  EXPECT_EXIT(static_cast<void>(ProcessState::of<First>()), ::testing::KilledBySignal(SIGABRT), kNotInstalled);
+}
+
 TEST_F(ProcessStateTest, ManyThreadsGetTheOne) {
   std::vector<std::shared_ptr<First>> found(8);
   std::vector<std::thread> threads;
@@ -87,7 +114,7 @@ TEST_F(ProcessStateTest, ManyThreadsGetTheOne) {
 }
 
 TEST(ProcessStateDeathTest, WithoutAnInstallationThereIsNone) {
-  EXPECT_DEATH(static_cast<void>(ProcessState::of<First>()), "facilities are not installed");
+  EXPECT_EXIT(static_cast<void>(ProcessState::of<First>()), ::testing::KilledBySignal(SIGABRT), kNotInstalled);
 }
 
 }  // namespace

@@ -120,6 +120,7 @@ TEST_F(TarnReportingLogTest, BoolsPrintOneOrZero) {
 
 TEST_F(TarnReportingLogTest, HexadecimalPrintsTheBits) {
   EXPECT_EQ(formatted("0x%x 0x%x", 0x2104481CU, -1), "0x2104481c 0xffffffffffffffff");
+  EXPECT_EQ(formatted("%x %x", true, false), "1 0");
 }
 
 TEST_F(TarnReportingLogTest, DoublesPrintSixDecimalsBehindFAndTheirTextFormElsewhere) {

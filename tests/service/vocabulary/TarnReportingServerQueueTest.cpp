@@ -30,12 +30,12 @@ TEST_F(TarnReportingServerQueueTest, WorkOfTheServerQueuePasses) {
 TEST_F(TarnReportingServerQueueTest, WorkOfAnotherQueueEndsTheProcess) {
   const auto other = platform_.workQueues.makeSerialQueue("other", platform::QualityOfService::Utility);
   other->async([] { TarnReportingRequireServerQueue(); });
-  EXPECT_DEATH(platform_.runUntilIdle(), "code of the server queue was called outside it");
+  EXPECT_DEATH(platform_.runUntilIdle(), "tarnkit: code of the server queue was called outside it");
 }
 
 TEST_F(TarnReportingServerQueueTest, AnotherThreadEndsTheProcess) {
   const auto call = [] { std::thread([] { TarnReportingRequireServerQueue(); }).join(); };
-  EXPECT_DEATH(call(), "code of the server queue was called outside it");
+  EXPECT_DEATH(call(), "tarnkit: code of the server queue was called outside it");
 }
 
 }  // namespace

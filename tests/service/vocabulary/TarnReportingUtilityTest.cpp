@@ -169,6 +169,12 @@ TEST_F(TarnReportingUtilityTest, AddDatesStampsACopyAndReplacesOlderStamps) {
   EXPECT_EQ(message, (plist::Dictionary{{"tarnreporting_timestamp", "old"}, {"volume", 0.5}}));
 }
 
+TEST_F(TarnReportingUtilityTest, AddDatesAppendsItsStampsInTheirOrder) {
+  const plist::Dictionary expected{
+      {"volume", 0.5}, {"tarnreporting_timestamp", 0}, {"systemuptime_sec", 0}, {"processuptime_ms", 0}};
+  EXPECT_TRUE(TarnReportingUtilityAddDates({{"volume", 0.5}}).sharesKeysWith(expected));
+}
+
 TEST_F(TarnReportingUtilityTest, ProcessorTimeIsComputedInSinglePrecision) {
   platform_.clock.setProcessorTicks(100'000'001'000);  // 100000001 ms, which single precision can't hold
   EXPECT_EQ(TarnReportingUtilityAddDates({}).get("processuptime_ms").asInt64(), 100'000'000);

@@ -32,4 +32,10 @@ int nobodyCalls(int number) {
   return number * 3;
 }
 
+void refuseNegative(int number) {
+  if (number < 0) {
+    std::abort();
+  }
+}
+
 }  // namespace sums

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstdlib>
 #include <string>
 #include <vector>
 
@@ -13,5 +14,6 @@ int larger(int a, int b);
 int limited(int number);
 std::vector<std::string> steps(bool skipsLast);
 int nobodyCalls(int number);
+void refuseNegative(int number);
 
 }  // namespace sums

@@ -21,3 +21,8 @@ TEST(Sums, Small) {
   EXPECT_TRUE(sums::isSmall(9));
   EXPECT_FALSE(sums::isSmall(10));
 }
+
+TEST(Sums, RefusesANegativeNumber) {
+  sums::refuseNegative(0);
+  EXPECT_DEATH(sums::refuseNegative(-1), "");
+}
