@@ -96,7 +96,6 @@ void TarnReportingSession::updateConfigurationWithContentsOfConfiguration(const 
 }
 
 void TarnReportingSession::start() {
-  TarnReportingRequireServerQueue();
   appendMarker(AudioEventType::Start, "start");
   kLog(LogLevel::Info, "start called. reporterID=%lli", reporterID_);
   if (started_) {
@@ -110,7 +109,6 @@ void TarnReportingSession::start() {
 }
 
 void TarnReportingSession::stop() {
-  TarnReportingRequireServerQueue();
   appendMarker(AudioEventType::Stop, "stop");
   kLog(LogLevel::Debug, "stop called. reporterID=%lli", reporterID_);
   if (!started_) {
@@ -126,6 +124,7 @@ void TarnReportingSession::stop() {
 }
 
 void TarnReportingSession::appendMarker(AudioEventType type, std::string_view method) {
+  TarnReportingRequireServerQueue();
   const std::string suffix(method);
   const std::size_t count = log_.size();
   auto marker = std::make_shared<TarnReportingSessionMessage>(

@@ -3,8 +3,7 @@
 //
 // The rule is defined by a walk from the newest record to the oldest for one of the same category and type. The log
 // keeps the answer of that walk for every pair of category and type, so that a look-up costs the same in a long session
-// as in a short one. A sort changes what the walk would find: the answers are then made anew by one pass, when next
-// asked for.
+// as in a short one. A sort changes what the walk would find: the answers are then made anew by one pass.
 //
 // Owner: the session. Threads: the server queue.
 #pragma once
@@ -34,13 +33,8 @@ class TarnReportingSessionMessageLog {
   std::size_t size() const noexcept { return messages_.size(); }
 
  private:
-  struct Hash {
-    std::size_t operator()(std::uint64_t key) const noexcept;
-  };
-
   TarnReportingSessionMessages messages_;
-  mutable std::unordered_map<std::uint64_t, const TarnReportingSessionMessage*, Hash> newest_;
-  mutable bool newestIsStale_ = false;
+  std::unordered_map<std::uint64_t, const TarnReportingSessionMessage*> newest_;
 };
 
 }  // namespace tarn

@@ -19,33 +19,30 @@ plist::Dictionary dictionaryOf(const Values& values) {
 }  // namespace
 
 void TarnReportingSessionPreviousValues::merge(const plist::Dictionary& payload) {
-  if (payload.empty()) {
-    return;
-  }
   const auto sameKeys = std::find_if(recent_.rbegin(), recent_.rend(),
                                      [&](const plist::Dictionary& other) { return other.sharesKeysWith(payload); });
   if (sameKeys != recent_.rend()) {
     *sameKeys = payload;
     std::rotate(std::prev(sameKeys.base()), sameKeys.base(), recent_.end());
-    return;
-  }
-  if (recent_.size() == kRecentLimit) {
+  } else if (recent_.size() != kRecentLimit) {
+    recent_.push_back(payload);
+  } else {
     for (const plist::Dictionary::Entry& entry : recent_.front()) {
       older_.insert_or_assign(entry.key, plist::Value(entry.value));
     }
-    recent_.erase(recent_.begin());
+    recent_.front() = payload;
+    std::rotate(recent_.begin(), std::next(recent_.begin()), recent_.end());
   }
-  recent_.push_back(payload);
 }
 
 void TarnReportingSessionPreviousValues::merge(const TarnReportingSessionPreviousValues& other) {
-  if (recent_.empty() && older_.empty()) {
+  if (recent_.empty()) {
     *this = other;
-    return;
-  }
-  merge(dictionaryOf(other.older_));
-  for (const plist::Dictionary& payload : other.recent_) {
-    merge(payload);
+  } else {
+    merge(dictionaryOf(other.older_));
+    for (const plist::Dictionary& payload : other.recent_) {
+      merge(payload);
+    }
   }
 }
 

@@ -24,7 +24,7 @@ class TarnReportingSessionSummaryWorker : public TarnReportingSessionWorkerProto
       const std::shared_ptr<TarnReportingSession>& session);
   using TarnReportingSessionWorkerProtocol::TarnReportingSessionWorkerProtocol;
 
-  bool start();
+  static bool start() { return true; }
   void stop();
   void handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) override;
 

@@ -3,7 +3,6 @@
 #include <algorithm>
 
 #include "service/vocabulary/TarnReportingLog.h"
-#include "service/vocabulary/TarnReportingServerQueue.h"
 #include "service/vocabulary/TarnReportingSignpost.h"
 #include "session/TarnReportingSession.h"
 #include "session/TarnReportingSessionMessage.h"
@@ -18,8 +17,6 @@ using Member = TarnReportingSessionWorkerSet::Member;
 
 // When a worker's turn comes: first one kind of workers, then the other, then those of neither kind. A worker of both
 // kinds takes its earlier turn.
-constexpr int kTurns = 3;
-
 int turnToStart(const Member& member) {
   return member.consumer != nullptr ? 0 : member.workerClass->isProducer ? 1 : 2;
 }
@@ -30,7 +27,7 @@ int turnToStop(const Member& member) {
 
 template <class Act>
 void inTurns(const std::vector<Member>& members, int (*turnOf)(const Member&), const Act& act) {
-  for (int turn = 0; turn < kTurns; ++turn) {
+  for (const int turn : {0, 1, 2}) {
     for (const Member& member : members) {
       if (turnOf(member) == turn) {
         act(member);
@@ -60,7 +57,6 @@ bool wants(const Member& member, const TarnReportingSessionMessage& message) {
 
 void TarnReportingSessionWorkerSet::startWorkersFromClasses(const TarnReportingSessionWorkerClasses::List& classes,
                                                             const std::shared_ptr<TarnReportingSession>& session) {
-  TarnReportingRequireServerQueue();
   for (const Class* workerClass : classes) {
     makeWorker(*workerClass, session);
   }
@@ -121,7 +117,6 @@ void TarnReportingSessionWorkerSet::startWorkers(std::int64_t reporterID) {
 }
 
 void TarnReportingSessionWorkerSet::stopWorkers(std::int64_t reporterID) {
-  TarnReportingRequireServerQueue();
   inTurns(messageWorkers_, turnToStop, [reporterID](const Member& member) {
     if (!member.worker->started()) {
       return;

@@ -77,6 +77,21 @@ TEST_F(Intake, KeysWithBlanksThatBecomeOneAreSettledInWireOrder) {
   EXPECT_EQ(payload.size(), 6U);  // a_b_c, d, stamp, invalid stamp, tag, application
 }
 
+TEST_F(Intake, TagAndApplicationFollowTheKeysWhoseBlanksWereReplaced) {
+  std::string order;
+  for (const auto& entry : sent(makeSession(), stamped({{"a b", 1}, {"c", 2}}))) {
+    order += std::string(entry.key.text()) + " ";
+  }
+  EXPECT_EQ(order, "c tarnreporting_timestamp a_b audiotag HostApplicationDisplayID ");
+}
+
+TEST_F(Intake, PayloadWithoutBlanksInItsKeysIsNotMadeAnew) {
+  const auto record = message({{"a", "b c"}});
+  const plist::Dictionary before = record->message();
+  TarnReportingSession::removeWhiteSpaceFromKeys(*record);
+  EXPECT_TRUE(record->message().sharesStorageWith(before));
+}
+
 TEST_F(Intake, OnlyTheBlankIsReplaced) {
   const plist::Dictionary payload = sent(makeSession(), {{"a\tb\nc", 1}, {" ", 2}, {"x  y", 3}});
   EXPECT_EQ(payload["a\tb\nc"].asInt64(), 1);

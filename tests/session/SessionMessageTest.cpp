@@ -1,6 +1,15 @@
 #include "session/TarnReportingSessionMessage.h"
 
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <chrono>
 #include <cmath>
+#include <fstream>
+#include <iterator>
+#include <mutex>
+#include <thread>
 
 #include "tests/session/SessionFixture.h"
 
@@ -76,9 +85,46 @@ TEST_F(TarnReportingSessionMessageTest, SortingKeepsEqualTimesInOrderAndUnstampe
 }
 
 TEST_F(TarnReportingSessionMessageTest, SortingCountsAStampThatIsNoNumberAsNone) {
-  TarnReportingSessionMessages messages{stamped("5", 5), stamped("nan", std::nan("")), stamped("-1", -1)};
+  TarnReportingSessionMessages messages{stamped("0.5", 0.5), stamped("nan", std::nan("")), stamped("-0.5", -0.5)};
   TarnReportingSessionMessage::sortMessages(messages);
-  EXPECT_EQ(names(messages), (std::vector<std::string>{"-1", "nan", "5"}));
+  EXPECT_EQ(names(messages), (std::vector<std::string>{"-0.5", "nan", "0.5"}));
+}
+
+TEST_F(TarnReportingSessionMessageTest, SortingLeavesWhatIsInTimeOrderWhereItStands) {
+  TarnReportingSessionMessages messages{stamped("1", 1), stamped("2", 2)};
+  const auto* const first = &messages.front();
+  TarnReportingSessionMessage::sortMessages(messages);
+  EXPECT_EQ(&messages.front(), first);
+}
+
+// The state of a thread of this process, as the kernel tells it; 'S' while it sleeps.
+char stateOf(long thread) {
+  std::ifstream file("/proc/self/task/" + std::to_string(thread) + "/stat");
+  const std::string text(std::istreambuf_iterator<char>(file), {});
+  const std::size_t name = text.rfind(") ");
+  return name == std::string::npos ? '?' : text[name + 2];
+}
+
+TEST_F(TarnReportingSessionMessageTest, ThreadThatWaitsForTheGuardSleepsUntilItIsFree) {
+  const auto record = message({});
+  std::atomic<long> thread{0};
+  std::atomic<bool> taken{false};
+  record->lock();
+  std::thread other([&] {
+    thread = ::syscall(SYS_gettid);
+    const std::lock_guard guard(*record);
+    taken = true;
+  });
+  // A thread that spins is seen running now and then, one that sleeps never is.
+  const auto limit = std::chrono::steady_clock::now() + std::chrono::seconds(10);
+  for (int asleep = 0; asleep < 1000 && std::chrono::steady_clock::now() < limit;) {
+    asleep = thread != 0 && stateOf(thread) == 'S' ? asleep + 1 : 0;
+  }
+  EXPECT_EQ(stateOf(thread), 'S');
+  EXPECT_FALSE(taken);
+  record->unlock();
+  other.join();
+  EXPECT_TRUE(taken);
 }
 
 }  // namespace

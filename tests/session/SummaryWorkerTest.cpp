@@ -157,6 +157,12 @@ TEST_F(SummaryWorker, ThermalStatesHaveTheirNamesAndAnythingElseIsUnknown) {
   }
 }
 
+TEST_F(SummaryWorker, StopSendsNothingOnceItsSessionIsGone) {
+  TarnReportingSessionSummaryWorker worker{std::weak_ptr<TarnReportingSession>()};
+  worker.stop();
+  EXPECT_TRUE(platform_.log.entries().empty());
+}
+
 TEST_F(SummaryWorker, FailedFootprintQueryIsLoggedAndLeftOut) {
   platform_.processFacts.failPhysicalFootprint("no such task");
   const auto session = makeSession();

@@ -90,6 +90,18 @@ TEST_F(TallyWorker, KindsWhoseNumbersShareBitsHaveTheirOwnNames) {
   }
 }
 
+TEST_F(TallyWorker, RunsInASingleMessageSession) {
+  makeSession(1, TarnReportingSession::Mode::SingleMessage)->sendMessage(message({{"a", 1}}));
+  EXPECT_EQ(platform_.tally.sentNames(),
+            (std::vector<std::string>{"sys.oxbow.tarnkit.Playback.Start", "sys.oxbow.unknown.Playback.Start"}));
+}
+
+TEST_F(TallyWorker, SubmitsNothingOnceItsSessionIsGone) {
+  TarnReportingSessionTallyWorker worker{std::weak_ptr<TarnReportingSession>()};
+  worker.handleMessage(message({{"a", 1}}));
+  EXPECT_TRUE(platform_.tally.askedNames().empty());
+}
+
 TEST_F(TallyWorker, FloodOfKindsLeavesTheNamesRight) {
   const auto session = makeSession();
   for (std::uint32_t i = 0; i < 2000; ++i) {

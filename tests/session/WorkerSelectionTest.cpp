@@ -41,6 +41,21 @@ TEST_F(WorkerSelection, RowsAreReadOffTheClasses) {
   EXPECT_TRUE(Row::of<UnmakeableWorker>().initWithSession == nullptr);
 }
 
+TEST_F(WorkerSelection, RowOfNoClassIsNeitherConsumerNorProducer) {
+  const TarnReportingSessionWorkerClass none{};
+  EXPECT_TRUE(none.asConsumer == nullptr);
+  EXPECT_FALSE(none.isProducer);
+}
+
+TEST_F(WorkerSelection, WorkerCanBeHandedToAnotherSession) {
+  const auto first = makeSession(1);
+  const auto second = makeSession(2);
+  PlainWorker worker(first);
+  EXPECT_EQ(worker.session(), first);
+  worker.setSession(second);
+  EXPECT_EQ(worker.session(), second);
+}
+
 TEST_F(WorkerSelection, ClassWithoutInitWithSessionIsLeftOutAndLogged) {
   useWorkers<UnmakeableWorker, PlainWorker>();
   const auto session = makeSession();
