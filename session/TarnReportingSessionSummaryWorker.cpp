@@ -54,6 +54,11 @@ std::unique_ptr<TarnReportingSessionSummaryWorker> TarnReportingSessionSummaryWo
   return std::make_unique<TarnReportingSessionSummaryWorker>(session);
 }
 
+bool TarnReportingSessionSummaryWorker::start() {
+  setStarted(true);
+  return true;
+}
+
 void TarnReportingSessionSummaryWorker::handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) {
   const plist::Dictionary& payload = message->message();
   if (const plist::ValueView duration = payload.get(kSessionDuration)) {

@@ -24,7 +24,7 @@ class TarnReportingSessionSummaryWorker : public TarnReportingSessionWorkerProto
       const std::shared_ptr<TarnReportingSession>& session);
   using TarnReportingSessionWorkerProtocol::TarnReportingSessionWorkerProtocol;
 
-  static bool start() { return true; }
+  bool start();
   void stop();
   void handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) override;
 

@@ -30,6 +30,13 @@ TEST_F(SummaryWorker, SessionWithoutDurationsReportsZeroAverageAndCount) {
   EXPECT_EQ(summary["audiotag"].text(), "Session_GenericSummary");
 }
 
+TEST_F(SummaryWorker, StartingItMakesItAStartedOne) {
+  const auto worker = TarnReportingSessionSummaryWorker::initWithSession(makeSession());
+  EXPECT_FALSE(worker->started());
+  EXPECT_TRUE(worker->start());
+  EXPECT_TRUE(worker->started());
+}
+
 TEST_F(SummaryWorker, EmptySessionHasANegativeRedundantCount) {
   const auto session = makeSession();
   session->start();
