@@ -8,13 +8,13 @@ namespace {
 // surrogates and too large values show. The rest are 0x80 to 0xBF.
 struct Lead {
   std::size_t length;
-  unsigned char secondMin;
-  unsigned char secondMax;
+  unsigned char secondMin = 0;
+  unsigned char secondMax = 0;
 };
 
 Lead leadOf(unsigned char byte) noexcept {
-  if (byte < 0x80) return {1, 0, 0};
-  if (byte < 0xC2) return {0, 0, 0};
+  if (byte < 0x80) return {1};
+  if (byte < 0xC2) return {0};
   if (byte < 0xE0) return {2, 0x80, 0xBF};
   if (byte == 0xE0) return {3, 0xA0, 0xBF};
   if (byte == 0xED) return {3, 0x80, 0x9F};
@@ -22,7 +22,7 @@ Lead leadOf(unsigned char byte) noexcept {
   if (byte == 0xF0) return {4, 0x90, 0xBF};
   if (byte < 0xF4) return {4, 0x80, 0xBF};
   if (byte == 0xF4) return {4, 0x80, 0x8F};
-  return {0, 0, 0};
+  return {0};
 }
 
 }  // namespace
