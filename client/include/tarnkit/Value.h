@@ -36,7 +36,13 @@ using Array = std::vector<Value>;
 // Keeps its members in the order in which they were first set.
 class Dictionary {
  public:
-  Dictionary() = default;
+  // All made below, where a member is known whole.
+  Dictionary();
+  Dictionary(const Dictionary& other);
+  Dictionary(Dictionary&& other) noexcept;
+  Dictionary& operator=(const Dictionary& other);
+  Dictionary& operator=(Dictionary&& other) noexcept;
+  ~Dictionary();
   // Of a key given twice the later value stands at the earlier place.
   Dictionary(std::initializer_list<Member> members);
 
@@ -92,6 +98,13 @@ struct Member {
   std::string key;
   Value value;
 };
+
+inline Dictionary::Dictionary() = default;
+inline Dictionary::Dictionary(const Dictionary& other) = default;
+inline Dictionary::Dictionary(Dictionary&& other) noexcept = default;
+inline Dictionary& Dictionary::operator=(const Dictionary& other) = default;
+inline Dictionary& Dictionary::operator=(Dictionary&& other) noexcept = default;
+inline Dictionary::~Dictionary() = default;
 
 inline Dictionary::Dictionary(std::initializer_list<Member> members) {
   for (const Member& member : members) {
