@@ -7,6 +7,7 @@
 #include <utility>
 
 #include "host/log/HostLog.h"
+#include "host/loop/Settling.h"
 #include "host/settings/StateFolder.h"
 #include "host/system/DescriptorLimit.h"
 
@@ -166,14 +167,9 @@ void LinuxPlatform::end() {
 
 // What the workers' own queues hold reaches the recorder too, unless a back-end keeps it waiting.
 void LinuxPlatform::settleQueues() {
-  std::size_t left = workQueues_.unfinished();
-  while (!workQueues_.settle(settleTime_)) {
-    const std::size_t before = std::exchange(left, workQueues_.unfinished());
-    if (left >= before) {
-      hostLog(log_, kHostCategory, platform::LogLevel::Default, kModule,
-              std::to_string(left) + " pieces of work of the workers' queues are left undone");
-      return;
-    }
+  if (const std::size_t left = settleWhileShrinking(workQueues_, settleTime_); left > 0) {
+    hostLog(log_, kHostCategory, platform::LogLevel::Default, kModule,
+            std::to_string(left) + " pieces of work of the workers' queues are left undone");
   }
 }
 
