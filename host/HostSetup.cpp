@@ -45,7 +45,10 @@ std::optional<Refusal> HostSetup::prepare(const ServiceOptions& options) {
   }
   OpenedLog opening = openLog(options.logTarget, options.logLevel, clock);
   log = std::move(opening.log);
-  return log ? std::nullopt : std::optional<Refusal>(std::in_place, std::move(opening.error));
+  if (!log) {
+    return Refusal{std::move(opening.error)};
+  }
+  return std::nullopt;
 }
 
 std::optional<Refusal> HostSetup::readSettings(const ServiceOptions& options) {
