@@ -1,11 +1,15 @@
 // Locks whose use the compiler checks: what a lock guards says so where it is declared, and touching it without the
 // lock is an error (clang's -Wthread-safety, part of ./dev lint). Other compilers read none of the notes.
 //
-//   mutable platform::Mutex mutex_;
+//   mutable Mutex mutex_;
 //   std::size_t count_ TARN_GUARDED_BY(mutex_) = 0;
 //   void add() TARN_REQUIRES(mutex_);  // called with the lock held
 //
-// A function that lets go of its caller's lock for a while calls mutex_.unlock() and mutex_.lock() itself.
+// A function that releases its caller's lock for a while calls mutex_.unlock() and mutex_.lock() itself. A class that
+// is its own lock says so too: class TARN_CAPABILITY Record { void lock() TARN_ACQUIRE(); void unlock() TARN_RELEASE();
+// }.
+//
+// It lies on the lowest floor, since the tables of keys and of their lists have locks already.
 #pragma once
 
 #include <condition_variable>
@@ -18,19 +22,26 @@
 #define TARN_THREAD_NOTE(note)
 #endif
 
+#define TARN_CAPABILITY TARN_THREAD_NOTE(capability("mutex"))
+#define TARN_ACQUIRE() TARN_THREAD_NOTE(acquire_capability())
+#define TARN_RELEASE() TARN_THREAD_NOTE(release_capability())
 #define TARN_GUARDED_BY(mutex) TARN_THREAD_NOTE(guarded_by(mutex))
 #define TARN_REQUIRES(mutex) TARN_THREAD_NOTE(requires_capability(mutex))
+// For a function that reads without the lock what cannot change meanwhile; the reason stands beside it.
+#define TARN_UNCHECKED TARN_THREAD_NOTE(no_thread_safety_analysis)
 
-namespace tarn::platform {
+namespace tarn {
 
-class TARN_THREAD_NOTE(capability("mutex")) Mutex {
+class TARN_CAPABILITY Mutex {
  public:
   Mutex() = default;
   Mutex(const Mutex&) = delete;
   Mutex& operator=(const Mutex&) = delete;
 
-  void lock() TARN_THREAD_NOTE(acquire_capability()) { mutex_.lock(); }
-  void unlock() TARN_THREAD_NOTE(release_capability()) { mutex_.unlock(); }
+  void lock() TARN_ACQUIRE() { mutex_.lock(); }
+  void unlock() TARN_RELEASE() { mutex_.unlock(); }
+  // Whether it got the lock, without waiting for it.
+  bool tryLock() TARN_THREAD_NOTE(try_acquire_capability(true)) { return mutex_.try_lock(); }
 
  private:
   friend class ConditionVariable;
@@ -38,16 +49,31 @@ class TARN_THREAD_NOTE(capability("mutex")) Mutex {
   std::mutex mutex_;
 };
 
-// Holds the lock to the end of its scope.
+// One that its holder may take again.
+class TARN_CAPABILITY RecursiveMutex {
+ public:
+  RecursiveMutex() = default;
+  RecursiveMutex(const RecursiveMutex&) = delete;
+  RecursiveMutex& operator=(const RecursiveMutex&) = delete;
+
+  void lock() TARN_ACQUIRE() { mutex_.lock(); }
+  void unlock() TARN_RELEASE() { mutex_.unlock(); }
+
+ private:
+  std::recursive_mutex mutex_;
+};
+
+// Holds a lock to the end of its scope: a mutex, or an object that is its own lock.
+template <class Lock>
 class TARN_THREAD_NOTE(scoped_lockable) MutexLock {
  public:
-  explicit MutexLock(Mutex& mutex) TARN_THREAD_NOTE(acquire_capability(mutex)) : mutex_(mutex) { mutex_.lock(); }
+  explicit MutexLock(Lock& mutex) TARN_THREAD_NOTE(acquire_capability(mutex)) : mutex_(mutex) { mutex_.lock(); }
   MutexLock(const MutexLock&) = delete;
   MutexLock& operator=(const MutexLock&) = delete;
   ~MutexLock() TARN_THREAD_NOTE(release_capability()) { mutex_.unlock(); }
 
  private:
-  Mutex& mutex_;
+  Lock& mutex_;
 };
 
 // std::condition_variable on such a lock, which is held before and after each wait. A predicate says that it runs under
@@ -97,4 +123,4 @@ class ConditionVariable {
   std::condition_variable variable_;
 };
 
-}  // namespace tarn::platform
+}  // namespace tarn
