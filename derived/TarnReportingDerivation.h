@@ -1,7 +1,7 @@
 // What the producers that walk over a session's log at its stop do alike: walk, and send what came out.
 //
 // A walk is a class with `void take(const plist::Dictionary& payload)`, called for each message in order, and
-// `TarnReportingSessionMessages finish()`, called once behind the last.
+// `TarnReportingSessionMessages finish()`, called once after the last.
 //
 // Threads: the server queue.
 #pragma once

@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <cstdint>
-#include <mutex>
 #include <unordered_map>
 #include <utility>
 
@@ -58,7 +57,7 @@ platform::MaybeError createFile(const std::string& stem, std::string& path) {
 
 void markSessionStarted(TarnReportingSessionMessage& message) {
   static const plist::Key kIsSessionStarted("isSessionStarted");
-  const std::lock_guard guard(message);
+  const MutexLock guard(message);
   message.mutableMessage().set(kIsSessionStarted, message.isSessionStarted() ? "YES" : "NO");
 }
 

@@ -1,6 +1,5 @@
 #include "derived/TarnReportingSessionSystemMonitorWorker.h"
 
-#include <mutex>
 #include <utility>
 
 #include "derived/TarnReportingSystemMonitor.h"
@@ -52,7 +51,7 @@ bool TarnReportingSessionSystemMonitorWorker::start() {
     plist::Dictionary state;
     {
       // Read and observed in one step, so that no change falls between; sent without the lock.
-      const std::lock_guard guard(*systemMonitorDictionary_);
+      const MutexLock guard(*systemMonitorDictionary_);
       state = systemMonitorDictionary_->state(feature);
       observe(feature);
     }
@@ -85,7 +84,7 @@ void TarnReportingSessionSystemMonitorWorker::stop() {
   if (!systemMonitorDictionary_) {
     return;
   }
-  const std::lock_guard guard(*systemMonitorDictionary_);
+  const MutexLock guard(*systemMonitorDictionary_);
   for (const auto observer : std::exchange(observers_, {})) {
     systemMonitorDictionary_->removeObserver(observer);
   }

@@ -132,7 +132,7 @@ std::string textOf(ToolRun& run, const Tool& tool, std::chrono::nanoseconds dead
   return std::move(run.text);  // the tool's thread is through with it
 }
 
-// How long the next block is: it ends with the first line that ends behind the least size.
+// How long the next block is: it ends with the first line that ends after the least size.
 std::size_t blockLength(std::string_view text) {
   const std::size_t newline = text.find('\n', kBlockBytes);
   return newline == std::string_view::npos ? std::min(kBlockBytes, text.size()) : newline + 1;
@@ -150,7 +150,7 @@ std::size_t pieceLength(std::string_view block) {
 }
 
 // The log cuts an entry that is too long, so a block that a very long line made goes there in several entries, all
-// under the block's number: what stands behind their heads is the block.
+// under the block's number: what stands after their heads is the block.
 void logBlock(std::size_t number, std::string_view block) {
   while (!block.empty()) {
     const std::string_view piece = block.substr(0, pieceLength(block));

@@ -91,7 +91,7 @@ class LateWorker : public TarnReportingSessionWorkerProtocol,
 constexpr std::array kWorkers{TarnReportingSessionWorkerClass::of<EarlyWorker>(),
                               TarnReportingSessionWorkerClass::of<LateWorker>()};
 
-// The bytes, one after the other; zeros behind their end.
+// The bytes, one after the other; zeros after their end.
 class Bytes {
  public:
   Bytes(const std::uint8_t* data, std::size_t size) : data_(data), size_(size) {}

@@ -1,4 +1,4 @@
-// Bytes as a performance trace and, behind the first NUL, as descriptions of probes: they give intervals within the
+// Bytes as a performance trace and, after the first NUL, as descriptions of probes: they give intervals within the
 // trace or a failure, and probes of those intervals.
 #include <algorithm>
 #include <cstddef>

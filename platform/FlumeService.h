@@ -76,11 +76,12 @@ class FlumeService {
   // The channels of a group and sub-group; a missing name matches any.
   virtual Outcome<std::shared_ptr<const FlumeChannelSet>> copyChannels(const std::optional<std::string>& group,
                                                                        const std::optional<std::string>& subGroup) = 0;
+  // Begins to watch the channels, until the subscription is destroyed.
   virtual Subscribed subscribe(const FlumeChannelSet& channels) = 0;
   // What the subscribed channels hold now. A channel that can't be read is missing from it.
   virtual SamplesOutcome createSamples(FlumeSubscription& subscription, const FlumeChannelSet& subscribedChannels) = 0;
   // Later minus earlier for values, hits, transitions and residencies, the later sample's own for the rest. Hits,
-  // transitions or residencies that fell mean that the driver began anew: the later number counts. Against nothing it
+  // transitions or residencies that fell mean that the driver restarted: the later number counts. Against nothing it
   // is the later sample.
   virtual SamplesOutcome createDelta(const std::shared_ptr<const FlumeSamples>& earlier,
                                      const std::shared_ptr<const FlumeSamples>& later) = 0;

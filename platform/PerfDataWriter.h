@@ -19,11 +19,13 @@ class PerfDataWriter {
   using Extension = std::uint32_t;
 
   virtual ~PerfDataWriter() = default;
+  // Appends a measurement with this value, in this unit.
   virtual void newValue(std::string_view name, PerfDataUnit unit, double value) = 0;
   // One extension is open at a time.
   virtual Extension startExtension(std::string_view name) = 0;
   // A member of the extension's JSON object, with a text as its value.
   virtual void stringMember(Extension extension, std::string_view name, std::string_view text) = 0;
+  // Ends the extension: no member follows.
   virtual void endExtension(Extension extension) = 0;
   // Finishes the file. A writer that is destroyed unclosed leaves no complete file.
   [[nodiscard]] virtual MaybeError close() = 0;

@@ -23,13 +23,17 @@ class ProcessFacts {
   };
 
   virtual ~ProcessFacts() = default;
+  // Of this process; greater than 0.
   virtual std::int32_t ownProcessIdentifier() const = 0;
   // The name of a process; nothing when it is gone or hidden.
   virtual std::optional<std::string> processName(std::int32_t processIdentifier) const = 0;
   // Physical memory that this process holds (resident or swapped out), in bytes.
   virtual Footprint physicalFootprint() const = 0;
+  // How warm the device is now.
   virtual ThermalState thermalState() const = 0;
+  // Whether the device saves power now.
   virtual bool lowPowerModeEnabled() const = 0;
+  // The mean numbers of running and waiting threads over the last 1, 5 and 15 minutes.
   virtual LoadAverages loadAverages() const = 0;
 };
 

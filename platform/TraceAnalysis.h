@@ -40,6 +40,7 @@ class TraceModel {
 class TraceAnalysisLibrary {
  public:
   virtual ~TraceAnalysisLibrary() = default;
+  // Opens the trace file at this path. The model is never null without an error.
   virtual Outcome<std::shared_ptr<TraceModel>> openTrace(std::string_view location) = 0;
   // The probes that the descriptions ask for, in their order; a description that asks for none is skipped.
   virtual std::vector<TraceProbe> probesForDictionaries(const std::vector<plist::Dictionary>& descriptions,

@@ -52,7 +52,7 @@ std::size_t storageBytesBehind(const ValueView& value) noexcept {
   }
 }
 
-// The list with these keys behind it. One or two are what bursts of settings bring, over and over: such a list
+// The list with these keys after its own. One or two are what bursts of settings bring, over and over: such a list
 // remembers how it was extended.
 KeyList keysWith(KeyList list, std::span<const Key* const> added) {
   constexpr std::size_t kFew = 2;

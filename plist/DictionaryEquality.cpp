@@ -44,7 +44,7 @@ bool isIgnored(const Key& key, std::span<const Key> ignored) noexcept {
   return std::find(ignored.begin(), ignored.end(), key) != ignored.end();
 }
 
-// Two dictionaries of one key list: ignored values are passed over unseen, equal bytes many at a time, and only the
+// Two dictionaries of one key list: ignored values are skipped unseen, equal bytes many at a time, and only the
 // values that hold a difference are looked at.
 bool equalWithSameKeys(const Body& a, const Body& b, std::span<const Key> ignored) noexcept {
   const Key* key = a.keys->keys();

@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <cstdlib>
-#include <mutex>
 #include <new>
 #include <unordered_map>
 #include <unordered_set>
@@ -10,6 +9,7 @@
 
 #include "plist/KeyListBody.h"
 #include "plist/KeyText.h"
+#include "plist/ThreadSafety.h"
 
 namespace tarn::plist {
 
@@ -20,8 +20,8 @@ using detail::KeyListBody;
 constexpr std::size_t kLinearLimit = 16;  // up to here looking at every key is quicker than an index
 
 struct Table {
-  std::mutex mutex;
-  std::unordered_multimap<std::uint64_t, KeyListBody*> lists;
+  Mutex mutex;
+  std::unordered_multimap<std::uint64_t, KeyListBody*> lists TARN_GUARDED_BY(mutex);
 };
 
 Table& table() {
@@ -111,10 +111,10 @@ KeyListBody* makeBody(std::span<const Key> head, const Key* last, std::uint64_t 
   return body;
 }
 
-// The list of this hash that matches, with one more reference; null when there is none. The table is locked.
+// The list of this hash that matches, with one more reference; null when there is none.
 template <class Matches>
-KeyListBody* findList(const Table& locked, std::uint64_t hash, const Matches& matches) {
-  const auto [begin, end] = locked.lists.equal_range(hash);
+KeyListBody* findList(Table& all, std::uint64_t hash, const Matches& matches) TARN_REQUIRES(all.mutex) {
+  const auto [begin, end] = all.lists.equal_range(hash);
   for (auto found = begin; found != end; ++found) {
     if (matches(*found->second)) {
       found->second->references.fetch_add(1, std::memory_order_relaxed);
@@ -124,11 +124,11 @@ KeyListBody* findList(const Table& locked, std::uint64_t hash, const Matches& ma
   return nullptr;
 }
 
-// The list of `head` and, unless null, `last` behind it, found or made, with one more reference.
+// The list of `head` and, unless null, `last` after it, found or made, with one more reference.
 KeyListBody* internList(std::span<const Key> head, const Key* last, std::uint64_t hash) {
   const std::size_t count = head.size() + (last != nullptr ? 1 : 0);
   Table& all = table();
-  const std::lock_guard lock(all.mutex);
+  const MutexLock lock(all.mutex);
   KeyListBody* const found = findList(all, hash, [&](const KeyListBody& body) {
     return body.count == count && std::equal(head.begin(), head.end(), body.keys()) &&
            (last == nullptr || body.keys()[count - 1] == *last);
@@ -172,7 +172,7 @@ void releaseKeyList(KeyListBody* body) noexcept {
   while (body != nullptr && releaseUnlessLast(body->references)) {
     Table& all = table();
     {
-      const std::lock_guard lock(all.mutex);
+      const MutexLock lock(all.mutex);
       if (body->references.fetch_sub(1, std::memory_order_acq_rel) != 1) {
         return;
       }
@@ -231,7 +231,7 @@ std::optional<KeyList> KeyList::make(std::span<const Key* const> keys) {
   };
   Table& all = table();
   {
-    const std::lock_guard lock(all.mutex);
+    const MutexLock lock(all.mutex);
     if (detail::KeyListBody* const found = findList(all, hash, matches)) {
       return KeyList(found);
     }

@@ -14,7 +14,7 @@ namespace {
 constexpr double kTwoTo63 = 9223372036854775808.0;
 constexpr double kTwoTo64 = 18446744073709551616.0;
 
-// The part of a text that is a number: leading white space passed over, then sign, digits, point and exponent.
+// The part of a text that is a number: leading white space skipped, then sign, digits, point and exponent.
 std::string_view numberPart(std::string_view text) noexcept {
   const std::size_t begin = text.find_first_not_of(" \t\n\v\f\r");
   if (begin == std::string_view::npos) {

@@ -81,14 +81,14 @@ bool TarnReportingService::listenerShouldAcceptNewConnection(const std::shared_p
   kLog(LogLevel::Default, "newConnection: %@", [&] { return connection->description(); });
   std::shared_ptr<TarnReportingClientServerInstance> client;
   {
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     client = TarnReportingClientServerInstance::initWithPID(processIdentifier, weak_from_this());
     connection->setExportedObject(client);
   }
   TarnReportingUtilityGetReportingServerQueue()->async([self = shared_from_this(), client, processIdentifier] {
     client->setClientStartDate(TarnReportingFacilities().clock.epochSeconds());
     client->setClientProcessName(TarnReportingFacilities().processFacts.processName(processIdentifier).value_or(""));
-    const std::lock_guard lock(self->mutex_);
+    const MutexLock lock(self->mutex_);
     self->clients_.push_back(client);
   });
   const std::weak_ptr<TarnReportingClientServerInstance> weakClient = client;
@@ -130,7 +130,7 @@ void TarnReportingService::handleInvalidation(const std::weak_ptr<TarnReportingC
 TarnReportingService::Sessions TarnReportingService::getAllActiveReportingSessions() {
   TarnReportingRequireServerQueue();
   Sessions active;
-  for (const auto& client : clients_) {
+  for (const auto& client : getAllClients()) {
     Sessions ofClient;
     client->clientReportingSessionMap().forEach(
         [&](std::int64_t, const std::shared_ptr<TarnReportingSession>& session) {
@@ -146,7 +146,7 @@ TarnReportingService::Sessions TarnReportingService::getAllActiveReportingSessio
 }
 
 std::shared_ptr<TarnReportingSession> TarnReportingService::findReportingSessionForID(std::int64_t reporterID) {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   if (reporterID == 0 || !isReportingEnabled()) {
     return nullptr;
   }
@@ -180,7 +180,7 @@ TarnReportingService::Sessions TarnReportingService::findReportingSessionsForIDs
 }
 
 void TarnReportingService::removeClient(const TarnReportingClientServerInstance& client) {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   const auto found =
       std::find_if(clients_.begin(), clients_.end(), [&](const auto& listed) { return listed.get() == &client; });
   if (found != clients_.end()) {
@@ -194,7 +194,7 @@ void TarnReportingService::logReportingSessions() {
 }
 
 std::size_t TarnReportingService::sessionCount() const {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   std::size_t count = singleMessageSession_ ? 1 : 0;
   for (const auto& client : clients_) {
     count += client->clientReportingSessionMap().size();

@@ -1,7 +1,6 @@
 // The intake of TarnReportingSession: what happens to a message before any worker sees it, and to whom it goes.
 #include <array>
 #include <cassert>
-#include <mutex>
 #include <unordered_map>
 
 #include "platform/Clock.h"
@@ -113,7 +112,7 @@ void TarnReportingSession::addAudioMessageTag(TarnReportingSessionMessage& messa
 }
 
 void TarnReportingSession::addAppName(TarnReportingSessionMessage& message) const {
-  const std::lock_guard guard(message);
+  const MutexLock guard(message);
   plist::Dictionary& payload = message.mutableMessage();
   const plist::ValueView present = payload.get(keys::kHostApplicationDisplayID);
   if (present && !(present == plist::ValueView("Unknown"))) {

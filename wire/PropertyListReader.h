@@ -30,7 +30,7 @@ class PropertyListReader {
  public:
   PropertyListReader(CborReader& in, Sink& sink) noexcept : in_(in), sink_(sink) {}
 
-  // What was wrong when a read returned false; a text that lives for ever.
+  // What was wrong when a read returned false; a static text.
   const char* trouble() const noexcept { return trouble_; }
 
   // The entries or items of a container whose head was read. `depth` is its level, 1 for an outermost one.

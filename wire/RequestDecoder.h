@@ -4,7 +4,7 @@
 // A good frame is decoded in one pass. Only when that pass meets trouble is the frame looked at again, to tell a frame
 // that can be answered with an error from one that can't be read at all:
 //
-//   not one whole well-formed CBOR array, bytes behind it, no unsigned id    Unreadable: close the connection
+//   not one whole well-formed CBOR array, bytes after it, no unsigned id    Unreadable: close the connection
 //   unknown operation; wrong count, kind or range of an argument; something
 //   inside a dictionary argument that is no property list                    Refused: answer with the error, go on
 //

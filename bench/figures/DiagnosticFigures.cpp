@@ -124,7 +124,7 @@ std::vector<double> measureAdded(const Figure& figure, std::size_t windows) {
   Intake with(figure.workers);
   without.warm();
   with.warm();
-  // Behind the first of the others: a key list remembers the first list that was made of it, which has to be theirs.
+  // After the first of the others: a key list remembers the first list that was made of it, which has to be theirs.
   if (figure.held) {
     sendWanted(with.session());
   }

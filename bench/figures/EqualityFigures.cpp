@@ -1,4 +1,4 @@
-// The comparison behind the redundancy test: whether two messages say the same, leaving out when they were sent.
+// The comparison of the redundancy test: whether two messages say the same, leaving out when they were sent.
 #include <algorithm>
 #include <array>
 #include <vector>

@@ -5,7 +5,6 @@
 #include <charconv>
 #include <cmath>
 #include <cstdint>
-#include <mutex>
 #include <optional>
 #include <utility>
 
@@ -94,15 +93,15 @@ void send(TarnReportingSession& session, plist::Dictionary stats, AudioEventType
 
 // The process's one and the lock on it.
 struct Shared {
-  std::mutex lock;
-  std::shared_ptr<const TarnReportingDriverUtility> utility;  // guarded by lock
+  Mutex lock;
+  std::shared_ptr<const TarnReportingDriverUtility> utility TARN_GUARDED_BY(lock);
 };
 
 }  // namespace
 
 std::shared_ptr<const TarnReportingDriverUtility> TarnReportingDriverUtility::shared() {
   const auto shared = ProcessState::of<Shared>();
-  const std::lock_guard guard(shared->lock);
+  const MutexLock guard(shared->lock);
   platform::FlumeService* const flume = TarnReportingFacilities().flume;
   if (shared->utility == nullptr && flume != nullptr) {
     const auto utility = std::make_shared<TarnReportingDriverUtility>(*flume);

@@ -1,6 +1,5 @@
 #include "diagnostics/snare/TarnReportingSnareWorkerInstanceSSSLeaks.h"
 
-#include <mutex>
 #include <optional>
 #include <utility>
 
@@ -59,7 +58,7 @@ void TarnReportingSnareWorkerInstanceSSSLeaks::fire(const TarnReportingSessionMe
     return;
   }
   TarnReportingSnareProcessState::RateLimit& limit = processState_->systemSoundRateLimit();
-  const std::lock_guard guard(limit.lock);
+  const MutexLock guard(limit.lock);
   const double now = TarnReportingFacilities().clock.epochSeconds();
   if (firedRecently(limit.lastFire, now)) {
     kLog(LogLevel::Info, "Already fired TarnReportingSnareWorkerInstanceSSSLeaks recently.");

@@ -68,7 +68,7 @@ void ProcessState::clear() {
 }
 
 std::shared_ptr<void> ProcessState::find(const void* tag, std::shared_ptr<void> (*make)()) {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   const auto found =
       std::find_if(entries_.begin(), entries_.end(), [tag](const Entry& entry) { return entry.tag == tag; });
   if (found != entries_.end()) {
@@ -79,7 +79,7 @@ std::shared_ptr<void> ProcessState::find(const void* tag, std::shared_ptr<void> 
 }
 
 std::shared_ptr<void> ProcessState::takeLast() {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   if (entries_.empty()) {
     return nullptr;
   }

@@ -111,7 +111,7 @@ std::string formatDecimal(double value, std::size_t least, std::size_t most) {
 bool TarnReportingUtilityWait(platform::Condition& condition, double timeoutSeconds, const bool& flag,
                               std::string_view waitingText, std::string_view timeoutText,
                               const platform::LogCategory& logCategory) {
-  const std::lock_guard lock(condition);
+  const MutexLock lock(condition);
   while (!flag) {
     TarnReportingLog(logCategory, LogLevel::Info, kModule, "%@", waitingText);
     if (!condition.waitFor(std::chrono::duration<double>(timeoutSeconds))) {
@@ -126,7 +126,7 @@ bool TarnReportingUtilityWait(platform::Condition& condition, double timeoutSeco
 bool TarnReportingUtilityWait(platform::Condition& condition, std::chrono::nanoseconds timeout, const bool& flag) {
   const platform::Clock& clock = TarnReportingFacilities().clock;
   const auto deadline = clock.monotonic() + timeout;
-  const std::lock_guard lock(condition);
+  const MutexLock lock(condition);
   for (auto left = timeout; !flag && left > std::chrono::nanoseconds::zero(); left = deadline - clock.monotonic()) {
     if (!condition.waitFor(left)) {
       break;
@@ -136,7 +136,7 @@ bool TarnReportingUtilityWait(platform::Condition& condition, std::chrono::nanos
 }
 
 void TarnReportingUtilitySignal(platform::Condition& condition, bool& flag) {
-  const std::lock_guard lock(condition);
+  const MutexLock lock(condition);
   flag = true;
   condition.signal();
 }

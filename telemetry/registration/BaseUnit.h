@@ -21,7 +21,7 @@ class BaseUnit {
   // `queries` may be null; it outlives this.
   explicit BaseUnit(platform::AccessoryQueries* queries);
 
-  // Looks for accessories anew, and logs that it does.
+  // Looks for accessories again, and logs that it does.
   platform::MaybeError enumerateBluetoothDevices();
   // How many the last enumeration found.
   std::uint16_t getDeviceCount() const noexcept { return deviceCount_; }

@@ -1,6 +1,5 @@
 #include "telemetry/trace/TarnReportingTraceRecording.h"
 
-#include <mutex>
 #include <string_view>
 #include <utility>
 
@@ -52,19 +51,17 @@ TarnReportingTraceRecording::End TarnReportingTraceRecording::stop() {
 }
 
 std::optional<std::string> TarnReportingTraceRecording::finalTraceURL() const {
-  const std::lock_guard lock(*condition_);
+  const MutexLock lock(*condition_);
   return finalTraceURL_;
 }
 
 std::uint64_t TarnReportingTraceRecording::eventsLeftOut() const {
-  const std::lock_guard lock(*condition_);
+  const MutexLock lock(*condition_);
   return eventsLeftOut_;
 }
 
 void TarnReportingTraceRecording::performanceTraceDidStart(const platform::MaybeError& error) {
-  if (!isFirst(startTold_)) {
-    return;
-  }
+  if (const MutexLock lock(*condition_); std::exchange(startTold_, true)) return;
   if (error) {
     clearTraceSession();
     kLog(LogLevel::Error, "performanceTraceDidStart %@", error->text);
@@ -75,9 +72,7 @@ void TarnReportingTraceRecording::performanceTraceDidStart(const platform::Maybe
 }
 
 void TarnReportingTraceRecording::performanceTraceDidStop(const platform::MaybeError& error) {
-  if (!isFirst(stopTold_)) {
-    return;
-  }
+  if (const MutexLock lock(*condition_); std::exchange(stopTold_, true)) return;
   if (error) {
     clearTraceSession();
     kLog(LogLevel::Error, "performanceTraceDidStop %@", error->text);
@@ -88,20 +83,18 @@ void TarnReportingTraceRecording::performanceTraceDidStop(const platform::MaybeE
 
 void TarnReportingTraceRecording::performanceTraceDidComplete(const std::string& location, const std::string&,
                                                               const platform::MaybeError& error) {
-  if (!isFirst(completionTold_)) {
-    return;
-  }
+  if (const MutexLock lock(*condition_); std::exchange(completionTold_, true)) return;
   if (const auto completed = clearTraceSession()) {
     completed->setDelegate({});
     const std::uint64_t leftOut = completed->eventsLeftOut();
-    const std::lock_guard lock(*condition_);
+    const MutexLock lock(*condition_);
     eventsLeftOut_ = leftOut;
   }
   if (error) {
     kLog(LogLevel::Error, "performanceTraceDidComplete %@", error->text);
   } else {
     {
-      const std::lock_guard lock(*condition_);
+      const MutexLock lock(*condition_);
       finalTraceURL_ = location;
     }
     kLog(LogLevel::Info, "Performance Trace Completed: %@", location);
@@ -112,18 +105,13 @@ void TarnReportingTraceRecording::performanceTraceDidComplete(const std::string&
 }
 
 std::shared_ptr<platform::PerformanceTraceSession> TarnReportingTraceRecording::traceSession() const {
-  const std::lock_guard lock(*condition_);
+  const MutexLock lock(*condition_);
   return traceSession_;
 }
 
 std::shared_ptr<platform::PerformanceTraceSession> TarnReportingTraceRecording::clearTraceSession() {
-  const std::lock_guard lock(*condition_);
+  const MutexLock lock(*condition_);
   return std::exchange(traceSession_, nullptr);
-}
-
-bool TarnReportingTraceRecording::isFirst(bool& told) {
-  const std::lock_guard lock(*condition_);
-  return !std::exchange(told, true);
 }
 
 }  // namespace tarn

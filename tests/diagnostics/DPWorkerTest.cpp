@@ -256,7 +256,7 @@ TEST_F(DPWorker, WaitsBeforeTheRequest) {
   sendOverload(*session, {{"smallest_buffer_frame_size", 512}});
   EXPECT_EQ(gyres(), 1U);
   EXPECT_EQ(platform_.conditions.timeouts(), (std::vector<Seconds>{250ms}));
-  // The ten seconds count from the overload, not from the request behind the wait.
+  // The ten seconds count from the overload, not from the request after the wait.
   platform_.clock.setEpochSeconds(begin + 10.125);
   sendOverload(*session, {{"smallest_buffer_frame_size", 513}});
   EXPECT_EQ(gyres(), 2U);

@@ -284,7 +284,7 @@ TEST_F(MemoryLogWorker, WithoutANewlineBlocksAreOfFiveHundredAndTwelve) {
 
 TEST_F(MemoryLogWorker, ALongLineIsReadInPiecesEachWithItsTag) {
   const Strings found = blocksOf(kZones, std::string(2048, 'x') + "\n");
-  ASSERT_EQ(found.size(), 1U);  // the newline behind the second piece ends the first block
+  ASSERT_EQ(found.size(), 1U);  // the newline after the second piece ends the first block
   EXPECT_EQ(found[0], "WIRED LOG BLOCK 1\nwiredlog: " + std::string(2047, 'x') + "wiredlog: x\n");
 }
 
@@ -425,7 +425,7 @@ TEST_F(MemoryLogWorker, AWakeWithoutAResultWaitsOn) {
   EXPECT_EQ(waits, 3);
 }
 
-// The blocks behind their heads, by number.
+// The blocks after their heads, by number.
 std::map<std::string, std::string> joined(const Strings& entries) {
   std::map<std::string, std::string> texts;
   for (const std::string& entry : entries) {

@@ -33,7 +33,7 @@ void describe(CLI::App& app, Context& context) {
       ->capture_default_str()
       ->type_name("DIR");
   app.require_subcommand(1);
-  // The two options above may also stand behind the command.
+  // The two options above may also stand after the command.
   app.fallthrough();
   addRunCommand(app, context);
   addEventsCommand(app, context);

@@ -71,7 +71,7 @@ void takeUnknown(Bytes& bytes, std::uint64_t number, std::uint64_t type, int dep
   }
 }
 
-// Whether it goes on behind this field.
+// Whether it goes on after this field.
 bool takeField(Bytes& bytes, ModelIssue& issue) {
   const std::uint64_t tag = takeVarint(bytes);
   if (tag % 8 == 4) {

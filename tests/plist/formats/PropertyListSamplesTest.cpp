@@ -78,7 +78,7 @@ TEST_P(PropertyListSample, ATextAloneIsAPropertyList) {
 TEST_P(PropertyListSample, CutOffAtAnyByteItIsAFaultWithItsPlace) {
   const std::string whole = bytesOf(std::string("kinds.") + GetParam() + ".plist");
   const bool isXml = GetParam() == std::string("xml");
-  // What stands behind the last mark of XML is a line end.
+  // What stands after the last mark of XML is a line end.
   const std::size_t last = whole.size() - (isXml ? 1 : 0);
   for (std::size_t size = 0; size < last; ++size) {
     const PropertyListReading reading = readPropertyList(whole.substr(0, size));

@@ -74,7 +74,7 @@ TEST(WorkWeek, FirstOfJanuaryIsInWeekOneWhateverItsDay) {
 }
 
 TEST(WorkWeek, LastDaysOfDecemberBelongToTheNextYearsFirstWeek) {
-  platform::LocalTime sunday;  // 2023-12-31, a Sunday; the Monday behind it is the first of January
+  platform::LocalTime sunday;  // 2023-12-31, a Sunday; the Monday after it is the first of January
   sunday.year = 2023;
   sunday.month = 12;
   sunday.day = 31;

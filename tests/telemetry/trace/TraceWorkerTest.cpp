@@ -273,7 +273,7 @@ TEST_F(TraceWorker, AnswerBehindTheTimeOutIsLoggedAndChangesNothing) {
   facility().callbacks().set(ReplyFault::Hold);
   const auto session = makeTestSession();
   session->start();
-  EXPECT_EQ(facility().callbacks().deliverHeld(), 2U);  // of the start, and of the stop behind the time-out
+  EXPECT_EQ(facility().callbacks().deliverHeld(), 2U);  // of the start, and of the stop after the time-out
   EXPECT_FALSE(workerOf(*session).started());
   EXPECT_EQ(lines(LogLevel::Info), (Strings{"Performance Trace Started", "Performance Trace Stopped",
                                             "Performance Trace Completed: /device/traces/1"}));
