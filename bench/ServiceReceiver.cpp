@@ -23,8 +23,7 @@ ServiceReceiver::ServiceReceiver(const Settings& settings, const ServiceSetup& s
     : service_(settings, setup), request_(makeRequest()) {
   client::Options options;
   options.autoFlushBytes = writes == Writes::OneEach ? 0 : options.autoFlushBytes;
-  client::TarnReportingClient::Connected connected =
-      client::TarnReportingClient::connect(service_.socketPath(), options);
+  client::ClientConnection::Connected connected = client::ClientConnection::connect(service_.socketPath(), options);
   if (!connected.client) {
     fail(connected.error);
   }

@@ -155,7 +155,7 @@ std::string AlsaFlume::read(const Substream& substream, SumsByPath& sums, FlumeS
   const nanoseconds now = clock_.monotonic();
   const auto before = sums_.find(path);
   Sums& sum = sums.emplace(path, before == sums_.end() ? begun(*status, now) : before->second).first->second;
-  goOn(sum, *status, now);
+  advance(sum, *status, now);
 
   const platform::FlumeChannelName name{cardName(substream.card), groupOf(*info), substream.pcm,
                                         info->id.empty() ? substream.sub : info->id + " " + substream.sub};
@@ -189,7 +189,7 @@ AlsaFlume::Sums AlsaFlume::begun(const AlsaStatus& status, nanoseconds now) {
   return sums;
 }
 
-void AlsaFlume::goOn(Sums& sums, const AlsaStatus& status, nanoseconds now) {
+void AlsaFlume::advance(Sums& sums, const AlsaStatus& status, nanoseconds now) {
   const nanoseconds passed = std::max(now - sums.lastReading, nanoseconds(0));
   const bool triggered = status.triggerNanoseconds != sums.last.triggerNanoseconds;
   const bool changed = status.state != sums.last.state;

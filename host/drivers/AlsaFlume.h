@@ -74,7 +74,7 @@ class AlsaFlume final : public FlumeSource {
   static void addChannels(const platform::FlumeChannelName& substream, const Sums& sums,
                           platform::FlumeSamples& samples);
   static Sums begun(const AlsaStatus& status, std::chrono::nanoseconds now);
-  static void goOn(Sums& sums, const AlsaStatus& status, std::chrono::nanoseconds now);
+  static void advance(Sums& sums, const AlsaStatus& status, std::chrono::nanoseconds now);
 
   const std::string folder_;
   platform::Log& log_;

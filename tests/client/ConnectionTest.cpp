@@ -40,11 +40,11 @@ int listenAt(const std::string& path) {
   return fd;
 }
 
-TEST(TarnReportingClient, ConnectsToAListeningSocket) {
+TEST(ClientConnection, ConnectsToAListeningSocket) {
   const SocketPath place;
   const int listener = listenAt(place.path());
   ASSERT_GE(listener, 0);
-  const auto connected = TarnReportingClient::connect(place.path());
+  const auto connected = ClientConnection::connect(place.path());
   ASSERT_NE(connected.client, nullptr) << connected.error;
   EXPECT_TRUE(connected.client->connected());
   ScriptedServer server(::accept(listener, nullptr, nullptr));
@@ -53,19 +53,19 @@ TEST(TarnReportingClient, ConnectsToAListeningSocket) {
   ::close(listener);
 }
 
-TEST(TarnReportingClient, SaysWhyItCannotConnect) {
+TEST(ClientConnection, SaysWhyItCannotConnect) {
   const SocketPath place;
-  const auto missing = TarnReportingClient::connect(place.path());
+  const auto missing = ClientConnection::connect(place.path());
   EXPECT_EQ(missing.client, nullptr);
   EXPECT_EQ(missing.errorNumber, ENOENT);
   EXPECT_NE(missing.error.find(place.path()), std::string::npos);
   ::close(listenAt(place.path()));
-  EXPECT_EQ(TarnReportingClient::connect(place.path()).errorNumber, ECONNREFUSED);
-  EXPECT_EQ(TarnReportingClient::connect(std::string(200, 'x')).errorNumber, ENAMETOOLONG);
-  EXPECT_EQ(TarnReportingClient::connect("").client, nullptr);
+  EXPECT_EQ(ClientConnection::connect(place.path()).errorNumber, ECONNREFUSED);
+  EXPECT_EQ(ClientConnection::connect(std::string(200, 'x')).errorNumber, ENAMETOOLONG);
+  EXPECT_EQ(ClientConnection::connect("").client, nullptr);
 }
 
-TEST(TarnReportingClient, ALostConnectionFailsEverythingOutstandingThenTellsTheOwner) {
+TEST(ClientConnection, ALostConnectionFailsEverythingOutstandingThenTellsTheOwner) {
   Outcomes outcomes;
   Pair pair;
   Strings lost;
@@ -84,7 +84,7 @@ TEST(TarnReportingClient, ALostConnectionFailsEverythingOutstandingThenTellsTheO
   EXPECT_EQ(pair.client->fd(), -1);
 }
 
-TEST(TarnReportingClient, RepliesThatCameBeforeTheEndAreStillDelivered) {
+TEST(ClientConnection, RepliesThatCameBeforeTheEndAreStillDelivered) {
   Outcomes outcomes;
   Pair pair;
   pair.client->send(getAllReporters(), outcomes.handler("first"));
@@ -99,7 +99,7 @@ TEST(TarnReportingClient, RepliesThatCameBeforeTheEndAreStillDelivered) {
   EXPECT_EQ(outcomes.heard(), (Strings{"first ok", "second connection lost", "third connection lost"}));
 }
 
-TEST(TarnReportingClient, ACallOnALostConnectionSaysSo) {
+TEST(ClientConnection, ACallOnALostConnectionSaysSo) {
   Pair pair;
   pair.server->hangUp();
   EXPECT_EQ(pair.client->call(getAllReporters()).outcome, Outcome::ConnectionLost);
@@ -108,7 +108,7 @@ TEST(TarnReportingClient, ACallOnALostConnectionSaysSo) {
   EXPECT_EQ(pair.client->wait(std::chrono::seconds(5)), 0U);
 }
 
-TEST(TarnReportingClient, ABrokenPipeRaisesNoSignal) {
+TEST(ClientConnection, ABrokenPipeRaisesNoSignal) {
   Options options;
   options.autoFlushBytes = 0;
   Pair pair(options);
@@ -121,7 +121,7 @@ TEST(TarnReportingClient, ABrokenPipeRaisesNoSignal) {
   EXPECT_EQ(outcomes.heard(), Strings{"first connection lost"});
 }
 
-TEST(TarnReportingClient, AnUnreadableReplyEndsTheConnectionAndSaysWhy) {
+TEST(ClientConnection, AnUnreadableReplyEndsTheConnectionAndSaysWhy) {
   Pair pair;
   std::string why;
   pair.client->setLostHandler([&](const std::string& text) { why = text; });
@@ -131,7 +131,7 @@ TEST(TarnReportingClient, AnUnreadableReplyEndsTheConnectionAndSaysWhy) {
   EXPECT_EQ(why, "an unreadable reply: not a reply array");
 }
 
-TEST(TarnReportingClient, AReplyOverTheLimitEndsTheConnection) {
+TEST(ClientConnection, AReplyOverTheLimitEndsTheConnection) {
   Options options;
   options.maxReplyBytes = 10;
   Pair pair(options);
@@ -142,7 +142,7 @@ TEST(TarnReportingClient, AReplyOverTheLimitEndsTheConnection) {
   EXPECT_EQ(why, "a reply of 11 bytes is too long");
 }
 
-TEST(TarnReportingClient, CloseCancelsEverythingOutstanding) {
+TEST(ClientConnection, CloseCancelsEverythingOutstanding) {
   Outcomes outcomes;
   Pair pair;
   bool lost = false;
@@ -155,7 +155,7 @@ TEST(TarnReportingClient, CloseCancelsEverythingOutstanding) {
   EXPECT_EQ(pair.client->send(getAllReporters()), SendStatus::NotConnected);
 }
 
-TEST(TarnReportingClient, DestructionCancelsToo) {
+TEST(ClientConnection, DestructionCancelsToo) {
   Outcomes outcomes;
   {
     Pair pair;
@@ -164,7 +164,7 @@ TEST(TarnReportingClient, DestructionCancelsToo) {
   EXPECT_EQ(outcomes.heard(), Strings{"start cancelled"});
 }
 
-TEST(TarnReportingClient, AHandlerMayClose) {
+TEST(ClientConnection, AHandlerMayClose) {
   Outcomes outcomes;
   Pair pair;
   pair.client->send(getAllReporters(), [&](Reply&&) { pair.client->close(); });
@@ -175,7 +175,7 @@ TEST(TarnReportingClient, AHandlerMayClose) {
   EXPECT_EQ(outcomes.heard(), Strings{"other cancelled"});
 }
 
-TEST(TarnReportingClient, TheEndOfTheConnectionIsTheReplyToKillService) {
+TEST(ClientConnection, TheEndOfTheConnectionIsTheReplyToKillService) {
   Outcomes outcomes;
   Pair pair;
   pair.client->send(getAllReporters(), outcomes.handler("other"));

@@ -12,7 +12,7 @@ namespace {
 using testing::Pair;
 using testing::Served;
 
-TEST(TarnReportingClientDeathTest, ACallInsideAHandlerEndsTheProcess) {
+TEST(ClientConnectionDeathTest, ACallInsideAHandlerEndsTheProcess) {
   GTEST_FLAG_SET(death_test_style, "threadsafe");
   EXPECT_DEATH(
       {
@@ -25,7 +25,7 @@ TEST(TarnReportingClientDeathTest, ACallInsideAHandlerEndsTheProcess) {
       "call inside a reply handler");
 }
 
-TEST(TarnReportingClientDeathTest, UseByTwoThreadsAtOnceEndsTheProcess) {
+TEST(ClientConnectionDeathTest, UseByTwoThreadsAtOnceEndsTheProcess) {
   GTEST_FLAG_SET(death_test_style, "threadsafe");
   EXPECT_DEATH(
       {
@@ -36,7 +36,7 @@ TEST(TarnReportingClientDeathTest, UseByTwoThreadsAtOnceEndsTheProcess) {
       "used by two threads at the same time");
 }
 
-TEST(TarnReportingClient, ThreadsMayUseOneClientInTurn) {
+TEST(ClientConnection, ThreadsMayUseOneClientInTurn) {
   Pair pair;
   constexpr std::size_t kThreads = 4;
   constexpr std::size_t kCalls = 200;
@@ -56,7 +56,7 @@ TEST(TarnReportingClient, ThreadsMayUseOneClientInTurn) {
   EXPECT_EQ(good, kThreads * kCalls);
 }
 
-TEST(TarnReportingClient, ManyClientsOnTheirOwnThreadsDoNotMeet) {
+TEST(ClientConnection, ManyClientsOnTheirOwnThreadsDoNotMeet) {
   std::vector<std::thread> threads;
   std::atomic<std::size_t> good{0};
   for (int i = 0; i < 4; ++i) {

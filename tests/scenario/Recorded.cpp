@@ -92,7 +92,7 @@ std::vector<RecordedEvent> repliesTo(const std::string& script, const std::strin
 ServiceWatch::ServiceWatch(const std::string& socket, double patienceSeconds) {
   const auto deadline = deadlineIn(patienceSeconds);
   while (!client_) {
-    auto connected = client::TarnReportingClient::connect(socket);
+    auto connected = client::ClientConnection::connect(socket);
     client_ = std::move(connected.client);
     if (!client_ && Clock::now() > deadline) {
       throw std::runtime_error("the service can't be reached: " + connected.error);

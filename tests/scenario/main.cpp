@@ -8,8 +8,8 @@
 #include <iostream>
 #include <stdexcept>
 
-#include "tests/scenario/Account.h"
 #include "tests/scenario/Comparison.h"
+#include "tests/scenario/PassReport.h"
 #include "tests/scenario/ScriptPlayer.h"
 #include "tests/scenario/Update.h"
 
@@ -106,7 +106,7 @@ int check(const Options& options) {
   const std::string summary = summaryOf(options, succeeded, differences.size(), recorded, playing);
   if (!options.details.empty()) writeDetails(options.details, summary, differences, events, comparison.matches());
   printDifferences(differences);
-  printAccount(summary, events);
+  printPassReport(summary, events);
   return succeeded ? EXIT_SUCCESS : EXIT_FAILURE;
 }
 

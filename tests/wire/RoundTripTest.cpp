@@ -174,7 +174,7 @@ TEST(RoundTrip, DamagedFramesGetAnOutcomeThatFitsTheirBytes) {
         bytes[maker.below(bytes.size())] = static_cast<char>(maker.below(256));
       }
       const testing::Decoded decoded = testing::decodeBytes(bytes);
-      ++outcomes[static_cast<std::size_t>(decoded.outcome)];
+      ++outcomes[static_cast<std::size_t>(decoded.verdict)];
       const bool wellFormed = checkOneItem(asBytes(bytes)) == nullptr;
       if (!decoded.unreadable()) {
         EXPECT_TRUE(wellFormed) << testing::toHex(bytes);

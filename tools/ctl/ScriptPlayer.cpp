@@ -20,9 +20,9 @@ namespace tarn::ctl {
 
 namespace {
 
+using client::ClientConnection;
 using client::Outcome;
 using client::Reply;
-using client::TarnReportingClient;
 using script::ScriptLines;
 using script::ScriptStep;
 
@@ -261,7 +261,7 @@ ScriptPlayer::Connection* ScriptPlayer::connect(const std::string& name) {
     }
     return &found->second;
   }
-  auto connected = TarnReportingClient::connect(socketPath_, connectionOptions());
+  auto connected = ClientConnection::connect(socketPath_, connectionOptions());
   if (!connected.client) {
     stop(kUnreachable, "the service can't be reached: " + connected.error);
     return nullptr;

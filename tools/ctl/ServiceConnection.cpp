@@ -13,7 +13,7 @@ Answer askService(const std::string& socketPath, const client::Request& request)
     answer.status = kWrongUsage;
     return answer;
   }
-  const auto connected = client::TarnReportingClient::connect(socketPath);
+  const auto connected = client::ClientConnection::connect(socketPath);
   if (!connected.client) {
     complain("the service can't be reached: " + connected.error);
     answer.status = kUnreachable;

@@ -26,7 +26,7 @@ class TraceWorker : public TraceFixture {
     facility().callbacks().set(ReplyFault::Hold);
     platform_.conditions.onWait([this](auto) {
       facility().callbacks().deliverHeld();
-      return WaitOutcome::TimesOut;  // unless that signalled
+      return WaitEnd::TimesOut;  // unless that signalled
     });
   }
 };
@@ -148,7 +148,7 @@ TEST_F(TraceWorker, WakeUpAtTheVeryEndOfTheTimeIsTheEnd) {
   facility().callbacks().set(ReplyFault::Hold);
   platform_.conditions.onWait([this](auto) {
     platform_.clock.advance(5s);
-    return WaitOutcome::Wakes;
+    return WaitEnd::Wakes;
   });
   makeTestSession()->start();
   EXPECT_EQ(waits(), (std::vector<double>{15, 10, 5}));
@@ -159,7 +159,7 @@ TEST_F(TraceWorker, WakeUpANanosecondBeforeTheEndIsNotTheEnd) {
   facility().callbacks().set(ReplyFault::Hold);
   platform_.conditions.onWait([this](auto timeout) {
     platform_.clock.advance(timeout.count() > 1 ? 15s - 1ns : 1ns);
-    return WaitOutcome::Wakes;
+    return WaitEnd::Wakes;
   });
   makeTestSession()->start();
   EXPECT_EQ(waits(), (std::vector<double>{15, 1e-9}));
@@ -235,7 +235,7 @@ TEST_F(TraceWorker, WakeUpWithoutAnAnswerDoesNotProlongTheWait) {
   facility().callbacks().set(ReplyFault::Hold);
   platform_.conditions.onWait([this](auto) {
     platform_.clock.advance(4s);
-    return WaitOutcome::Wakes;
+    return WaitEnd::Wakes;
   });
   const auto session = makeTestSession();
   session->start();
@@ -396,7 +396,7 @@ TEST_F(TraceWorker, EvaluationIsAnnouncedAsABlockOnPurposeAndTheWaitsAreNotPartO
   platform_.conditions.onWait([&](auto) {
     blockedWhileWaiting = platform_.conditions.isBlockedOnPurpose();
     facility().callbacks().deliverHeld();
-    return WaitOutcome::TimesOut;
+    return WaitEnd::TimesOut;
   });
   bool blockedWhileReading = false;
   platform_.traceAnalysis.onLoad([&] { blockedWhileReading = platform_.conditions.isBlockedOnPurpose(); });
@@ -471,7 +471,7 @@ TEST_F(TraceWorker, AnswersMayComeFromAnotherThread) {
   facility().callbacks().set(ReplyFault::OtherThread);
   platform_.conditions.onWait([this](auto) {
     facility().callbacks().joinThreads();
-    return WaitOutcome::TimesOut;
+    return WaitEnd::TimesOut;
   });
   platform_.traceAnalysis.setIntervals({interval("a", 0.5)});
   play();
@@ -487,7 +487,7 @@ TEST_F(TraceWorker, AnswersFromOtherThreadsRaceWithTimeOutsAndEnds) {
   int waited = 0;
   platform_.conditions.onWait([&waited](auto) {
     if (++waited % 3 != 0) std::this_thread::yield();
-    return WaitOutcome::TimesOut;
+    return WaitEnd::TimesOut;
   });
   for (int count = 0; count < kSessions; ++count) {
     auto session = makeTestSession();

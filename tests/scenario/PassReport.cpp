@@ -1,4 +1,4 @@
-#include "tests/scenario/Account.h"
+#include "tests/scenario/PassReport.h"
 
 #include <cstdio>
 #include <fstream>
@@ -21,7 +21,7 @@ std::string meaningOf(const std::string& backend) {
 
 }  // namespace
 
-void printAccount(const std::string& summary, const std::vector<RecordedEvent>& events) {
+void printPassReport(const std::string& summary, const std::vector<RecordedEvent>& events) {
   std::map<std::string, std::size_t> counts;
   for (const RecordedEvent& event : events) ++counts[event.backend];
   std::string line;

@@ -1,4 +1,4 @@
-// TarnReportingClient: what tarnkit::TarnReportingClient stands on, and the tools with it: the same client with the
+// ClientConnection: what tarnkit::TarnReportingClient stands on, and the tools with it: the same client with the
 // requests and values of the wire. What it promises stands in its public header.
 #pragma once
 
@@ -26,26 +26,26 @@ namespace tarn::client {
 using tarnkit::Options;
 using tarnkit::SendStatus;
 
-class TarnReportingClient {
+class ClientConnection {
  public:
   using Milliseconds = std::chrono::milliseconds;
   using LostHandler = std::function<void(const std::string& why)>;
 
   struct Connected {
-    std::unique_ptr<TarnReportingClient> client;  // null on failure
-    int errorNumber = 0;                          // of the system call that failed
-    std::string error;                            // what failed, with the path
+    std::unique_ptr<ClientConnection> client;  // null on failure
+    int errorNumber = 0;                       // of the system call that failed
+    std::string error;                         // what failed, with the path
   };
   // Connects to the service's socket. Doesn't wait beyond what the kernel does.
   static Connected connect(const std::string& path, const Options& options);
   static Connected connect(const std::string& path) { return connect(path, Options()); }
 
   // Takes over a connected stream socket.
-  TarnReportingClient(Socket socket, const Options& options);
+  ClientConnection(Socket socket, const Options& options);
   // Closes.
-  ~TarnReportingClient();
-  TarnReportingClient(const TarnReportingClient&) = delete;
-  TarnReportingClient& operator=(const TarnReportingClient&) = delete;
+  ~ClientConnection();
+  ClientConnection(const ClientConnection&) = delete;
+  ClientConnection& operator=(const ClientConnection&) = delete;
 
   void setLostHandler(LostHandler handler);
 
