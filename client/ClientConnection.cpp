@@ -10,12 +10,11 @@ namespace tarn::client {
 static_assert(Options().maxFrameBytes == wire::kDefaultMaxFrameBytes);
 
 ClientConnection::Connected ClientConnection::connect(const std::string& path, const Options& options) {
-  Connected connected;
-  Socket socket = Socket::connect(path, connected.errorNumber, connected.error);
-  if (socket.open()) {
-    connected.client = std::make_unique<ClientConnection>(std::move(socket), options);
+  Result<Socket> socket = Socket::connect(path);
+  if (socket.failed()) {
+    return {nullptr, std::move(socket.error)};
   }
-  return connected;
+  return {std::make_unique<ClientConnection>(std::move(socket.value), options), {}};
 }
 
 ClientConnection::ClientConnection(Socket socket, const Options& options)

@@ -1,5 +1,5 @@
 // ClientConnection: what tarnkit::TarnReportingClient stands on, and the tools with it: the same client with the
-// requests and values of the wire. What it promises stands in its public header.
+// requests and values of the wire. What it promises stands in that class's header.
 #pragma once
 
 #include <chrono>
@@ -16,6 +16,7 @@
 #include "client/Reply.h"
 #include "client/Requests.h"
 #include "client/Socket.h"
+#include "plist/Result.h"
 #include "wire/FrameBuffer.h"
 #include "wire/ReplyDecoder.h"
 
@@ -31,12 +32,8 @@ class ClientConnection {
   using Milliseconds = std::chrono::milliseconds;
   using LostHandler = std::function<void(const std::string& why)>;
 
-  struct Connected {
-    std::unique_ptr<ClientConnection> client;  // null on failure
-    int errorNumber = 0;                       // of the system call that failed
-    std::string error;                         // what failed, with the path
-  };
-  // Connects to the service's socket. Doesn't wait beyond what the kernel does.
+  using Connected = Result<std::unique_ptr<ClientConnection>>;
+  // Connects to the service's socket. Doesn't wait beyond what the kernel does. An error names the path.
   static Connected connect(const std::string& path, const Options& options);
   static Connected connect(const std::string& path) { return connect(path, Options()); }
 

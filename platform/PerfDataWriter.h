@@ -7,7 +7,7 @@
 #include <memory>
 #include <string_view>
 
-#include "platform/Outcome.h"
+#include "plist/Result.h"
 
 namespace tarn::platform {
 
@@ -26,15 +26,15 @@ class PerfDataWriter {
   virtual void stringMember(Extension extension, std::string_view name, std::string_view text) = 0;
   virtual void endExtension(Extension extension) = 0;
   // Finishes the file. A writer that is destroyed unclosed leaves no complete file.
-  [[nodiscard]] virtual MaybeError close() = 0;
+  [[nodiscard]] virtual Status close() = 0;
 };
 
 class PerfDataWriters {
  public:
   virtual ~PerfDataWriters() = default;
   // Opens a writer on a new file at `path`, replacing what is there. The error's code is the system's error number.
-  virtual Outcome<std::unique_ptr<PerfDataWriter>> open(std::string_view path, std::string_view name,
-                                                        std::int32_t resultsVersion, std::uint32_t flags) = 0;
+  virtual Result<std::unique_ptr<PerfDataWriter>> open(std::string_view path, std::string_view name,
+                                                       std::int32_t resultsVersion, std::uint32_t flags) = 0;
 };
 
 }  // namespace tarn::platform

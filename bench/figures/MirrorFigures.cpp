@@ -167,10 +167,10 @@ std::vector<double> measureLiveSessions(const Settings& settings) {
   setup.mirrorsSessions = true;
   const ServiceProcess service(settings, setup);
   auto connected = client::ClientConnection::connect(service.socketPath());
-  if (!connected.client) {
-    fail("can't connect: " + connected.error);
+  if (connected.failed()) {
+    fail("can't connect: " + connected.error->text);
   }
-  client::ClientConnection& client = *connected.client;
+  client::ClientConnection& client = *connected.value;
   const auto startSessions = [&](std::int64_t from, std::size_t count) {
     for (std::size_t i = 0; i < count; ++i) {
       const std::int64_t id = from + static_cast<std::int64_t>(i);

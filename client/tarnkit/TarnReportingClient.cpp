@@ -24,10 +24,10 @@ tarn::client::ReplyHandler unpacking(ReplyHandler handler) {
 TarnReportingClient::Connected TarnReportingClient::connect(const std::string& path, const Options& options) {
   auto inner = tarn::client::ClientConnection::connect(path, options);
   Connected connected;
-  connected.errorNumber = inner.errorNumber;
-  connected.error = std::move(inner.error);
-  if (inner.client) {
-    connected.client = std::make_unique<TarnReportingClient>(std::move(inner.client));
+  connected.errorNumber = static_cast<int>(inner.error.code());
+  connected.error = inner.error.text();
+  if (inner.ok()) {
+    connected.client = std::make_unique<TarnReportingClient>(std::move(inner.value));
   }
   return connected;
 }

@@ -60,7 +60,7 @@ void SocketConnection::watch(std::uint32_t events) {
     host_.loop.unwatch(socket_.get());
   } else if (before != 0) {
     host_.loop.change(socket_.get(), events);
-  } else if (!host_.loop.watch(socket_.get(), events, shared_from_this())) {
+  } else if (host_.loop.watch(socket_.get(), events, shared_from_this()).failed()) {
     watchedEvents_ = 0;
     cut(CutReason::Reset, "can't wait for it" + errorSuffix(errno));
   }

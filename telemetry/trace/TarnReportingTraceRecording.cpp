@@ -61,11 +61,11 @@ std::uint64_t TarnReportingTraceRecording::eventsLeftOut() const {
   return eventsLeftOut_;
 }
 
-void TarnReportingTraceRecording::performanceTraceDidStart(const platform::MaybeError& error) {
+void TarnReportingTraceRecording::performanceTraceDidStart(const Status& error) {
   if (!isFirst(startTold_)) {
     return;
   }
-  if (error) {
+  if (error.failed()) {
     clearTraceSession();
     kLog(LogLevel::Error, "performanceTraceDidStart %@", error->text);
   } else {
@@ -74,11 +74,11 @@ void TarnReportingTraceRecording::performanceTraceDidStart(const platform::Maybe
   TarnReportingUtilitySignal(*condition_, answered_);
 }
 
-void TarnReportingTraceRecording::performanceTraceDidStop(const platform::MaybeError& error) {
+void TarnReportingTraceRecording::performanceTraceDidStop(const Status& error) {
   if (!isFirst(stopTold_)) {
     return;
   }
-  if (error) {
+  if (error.failed()) {
     clearTraceSession();
     kLog(LogLevel::Error, "performanceTraceDidStop %@", error->text);
   } else {
@@ -87,7 +87,7 @@ void TarnReportingTraceRecording::performanceTraceDidStop(const platform::MaybeE
 }
 
 void TarnReportingTraceRecording::performanceTraceDidComplete(const std::string& location, const std::string&,
-                                                              const platform::MaybeError& error) {
+                                                              const Status& error) {
   if (!isFirst(completionTold_)) {
     return;
   }
@@ -97,7 +97,7 @@ void TarnReportingTraceRecording::performanceTraceDidComplete(const std::string&
     const std::lock_guard lock(*condition_);
     eventsLeftOut_ = leftOut;
   }
-  if (error) {
+  if (error.failed()) {
     kLog(LogLevel::Error, "performanceTraceDidComplete %@", error->text);
   } else {
     {

@@ -45,24 +45,24 @@ TEST(ClientConnection, ConnectsToAListeningSocket) {
   const int listener = listenAt(place.path());
   ASSERT_GE(listener, 0);
   const auto connected = ClientConnection::connect(place.path());
-  ASSERT_NE(connected.client, nullptr) << connected.error;
-  EXPECT_TRUE(connected.client->connected());
+  ASSERT_TRUE(connected.ok()) << connected.error->text;
+  EXPECT_TRUE(connected.value->connected());
   ScriptedServer server(::accept(listener, nullptr, nullptr));
   const Served serving([&] { server.acknowledge(1); });
-  EXPECT_TRUE(connected.client->call(createReportingSession(5)).ok());
+  EXPECT_TRUE(connected.value->call(createReportingSession(5)).ok());
   ::close(listener);
 }
 
 TEST(ClientConnection, SaysWhyItCannotConnect) {
   const SocketPath place;
   const auto missing = ClientConnection::connect(place.path());
-  EXPECT_EQ(missing.client, nullptr);
-  EXPECT_EQ(missing.errorNumber, ENOENT);
-  EXPECT_NE(missing.error.find(place.path()), std::string::npos);
+  EXPECT_EQ(missing.value, nullptr);
+  EXPECT_EQ(missing.error.code(), ENOENT);
+  EXPECT_NE(missing.error.text().find(place.path()), std::string::npos);
   ::close(listenAt(place.path()));
-  EXPECT_EQ(ClientConnection::connect(place.path()).errorNumber, ECONNREFUSED);
-  EXPECT_EQ(ClientConnection::connect(std::string(200, 'x')).errorNumber, ENAMETOOLONG);
-  EXPECT_EQ(ClientConnection::connect("").client, nullptr);
+  EXPECT_EQ(ClientConnection::connect(place.path()).error.code(), ECONNREFUSED);
+  EXPECT_EQ(ClientConnection::connect(std::string(200, 'x')).error.code(), ENAMETOOLONG);
+  EXPECT_EQ(ClientConnection::connect("").value, nullptr);
 }
 
 TEST(ClientConnection, ALostConnectionFailsEverythingOutstandingThenTellsTheOwner) {

@@ -186,7 +186,7 @@ TEST_F(MemoryLogWorker, AToolThatFailsSilentlyIsCapturedAndLeavesNoBlock) {
 }
 
 TEST_F(MemoryLogWorker, AToolThatCannotBeStartedIsTold) {
-  platform_.commandRunner.describe(kZones, {"never read", {}, platform::PlatformError{11, "no more processes"}});
+  platform_.commandRunner.describe(kZones, {"never read", {}, Error{11, "no more processes"}});
   describe(kResources, "RESOURCE\n");
   request(*startedSession());
   EXPECT_EQ(notes()[1], "wiredlog: unable to execute '/usr/bin/zonetally -l'");

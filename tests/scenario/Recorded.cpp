@@ -93,9 +93,9 @@ ServiceWatch::ServiceWatch(const std::string& socket, double patienceSeconds) {
   const auto deadline = deadlineIn(patienceSeconds);
   while (!client_) {
     auto connected = client::ClientConnection::connect(socket);
-    client_ = std::move(connected.client);
+    client_ = std::move(connected.value);
     if (!client_ && Clock::now() > deadline) {
-      throw std::runtime_error("the service can't be reached: " + connected.error);
+      throw std::runtime_error("the service can't be reached: " + connected.error->text);
     }
     if (!client_) {
       std::this_thread::sleep_for(kPause);

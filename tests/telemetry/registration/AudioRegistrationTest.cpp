@@ -28,7 +28,7 @@ constexpr double kWeek = 604800;
 class NotedQueries final : public platform::AccessoryQueries {
  public:
   explicit NotedQueries(std::uint16_t count) : count_(count) {}
-  platform::Outcome<std::uint16_t> enumerate() override {
+  Result<std::uint16_t> enumerate() override {
     asked_.emplace_back("enumerate");
     return {count_, {}};
   }
@@ -209,7 +209,7 @@ TEST_F(AudioRegistration, BaseUnitWithoutQueriesHasNoDevices) {
   const auto info = std::make_shared<plist::Dictionary>();
   unit.setRegistrationInfoParams(info);
   EXPECT_EQ(unit.RegistrationInfoParams(), info);
-  EXPECT_FALSE(unit.enumerateBluetoothDevices());
+  EXPECT_TRUE(unit.enumerateBluetoothDevices().ok());
   EXPECT_EQ(unit.getDeviceCount(), 0);
   EXPECT_FALSE(unit.isDeviceWithCase(0));
   unit.loadParams(AccessoryPart::Left, 0);
@@ -221,7 +221,7 @@ TEST_F(AudioRegistration, BaseUnitAsksOnlyForDevicesThatItCounted) {
   BaseUnit unit(&platform_.accessories);
   const auto info = std::make_shared<plist::Dictionary>();
   unit.setRegistrationInfoParams(info);
-  ASSERT_FALSE(unit.enumerateBluetoothDevices());
+  ASSERT_TRUE(unit.enumerateBluetoothDevices().ok());
   EXPECT_EQ(unit.getDeviceCount(), 1);
   EXPECT_TRUE(unit.isDeviceWithCase(0));
   unit.loadParams(AccessoryPart::Left, 1);
@@ -256,7 +256,7 @@ TEST_F(AudioRegistration, MinuteAndDayCountFromTheEndOfTheEnumeration) {
   handle(kBuds);
   EXPECT_EQ(stored(kCheckKey), before + 7 + 60);
   platform_.advance(std::chrono::minutes(2));
-  platform_.accessories.failEnumeration(platform::PlatformError{5, "radio is off"});
+  platform_.accessories.failEnumeration(Error{5, "radio is off"});
   const double again = now();
   handle(kBuds);
   EXPECT_EQ(stored(kCheckKey), again + 7 + kDay);
@@ -269,7 +269,7 @@ TEST_F(AudioRegistration, MomentOfTheNextEnumerationIsStoredBeforeTheInfo) {
   EXPECT_EQ(writes[0].key, kCheckKey);
   EXPECT_EQ(writes[1].key, kInfoKey);
   platform_.advance(std::chrono::minutes(2));
-  platform_.accessories.failEnumeration(platform::PlatformError{5, "radio is off"});
+  platform_.accessories.failEnumeration(Error{5, "radio is off"});
   handle(kBuds);
   ASSERT_EQ(platform_.defaults.writes().size(), 3U);
   EXPECT_EQ(platform_.defaults.writes()[2].key, kCheckKey);
@@ -376,7 +376,7 @@ TEST_F(AudioRegistration, FailedEnumerationWaitsForADayAndKeepsTheInfo) {
   handle(kBuds);
   const auto before = state_->registrationInfo();
   platform_.advance(std::chrono::minutes(2));
-  platform_.accessories.failEnumeration(platform::PlatformError{5, "radio is off"});
+  platform_.accessories.failEnumeration(Error{5, "radio is off"});
   platform_.log.clear();
   handle(kBuds);
   EXPECT_EQ(messages().back(), "Exception in BT gatherData : radio is off");
@@ -565,8 +565,7 @@ TEST_F(AudioRegistration, AnEmptyListOfBackendsIsOneAllTheSame) {
 }
 
 TEST_F(AudioRegistration, RefusedMessageIsLoggedAndNotRepeated) {
-  platform_.rtcReporting.refuseMessages(
-      platform::RtcReportingSession::SendResult{false, platform::PlatformError{3, "too large"}});
+  platform_.rtcReporting.refuseMessages(platform::RtcReportingSession::SendResult{false, Error{3, "too large"}});
   makeDue();
   enumerate({buds(now()), buds(now())});
   worker_->stop();

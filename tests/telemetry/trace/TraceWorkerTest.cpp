@@ -12,7 +12,6 @@ namespace {
 using namespace testing;
 using namespace std::chrono_literals;
 using platform::LogLevel;
-using platform::PlatformError;
 
 class TraceWorker : public TraceFixture {
  protected:
@@ -197,8 +196,8 @@ TEST_F(TraceWorker, SessionIsLetGoBeforeItsErrorIsTold) {
     return std::make_shared<TarnReportingTraceRecording>(facility().createSession({}),
                                                          platform_.conditions.makeCondition());
   };
-  recording()->performanceTraceDidStart(PlatformError{5, "no buffer"});
-  recording()->performanceTraceDidStop(PlatformError{5, "disk gone"});
+  recording()->performanceTraceDidStart(Error{5, "no buffer"});
+  recording()->performanceTraceDidStop(Error{5, "disk gone"});
   EXPECT_EQ(told, (Strings{"log performanceTraceDidStart no buffer!", "log performanceTraceDidStop disk gone!"}));
 }
 
@@ -262,7 +261,7 @@ TEST_F(TraceWorker, StartWithoutAnAnswerStopsTheTraceAndIsNotTriedAgain) {
 }
 
 TEST_F(TraceWorker, TraceThatIsNotValidIsNotStoppedWhenItsStartTimesOut) {
-  facility().failStart(PlatformError{5, "no buffer"});
+  facility().failStart(Error{5, "no buffer"});
   facility().callbacks().set(ReplyFault::Drop);
   makeTestSession()->start();
   EXPECT_EQ(facility().traces().at(0).stops, 0U);
@@ -282,7 +281,7 @@ TEST_F(TraceWorker, AnswerBehindTheTimeOutIsLoggedAndChangesNothing) {
 }
 
 TEST_F(TraceWorker, StartWithAnErrorIsLoggedAndLeavesNothingToStop) {
-  facility().failStart(PlatformError{5, "no buffer"});
+  facility().failStart(Error{5, "no buffer"});
   const auto session = makeTestSession();
   session->start();
   EXPECT_TRUE(workerOf(*session).started());
@@ -294,7 +293,7 @@ TEST_F(TraceWorker, StartWithAnErrorIsLoggedAndLeavesNothingToStop) {
 }
 
 TEST_F(TraceWorker, SessionIsTracedAgainBehindAStartWithAnError) {
-  facility().failStart(PlatformError{5, "no buffer"});
+  facility().failStart(Error{5, "no buffer"});
   const auto session = makeTestSession();
   session->start();
   session->stop();
@@ -330,7 +329,7 @@ TEST_F(TraceWorker, StopWithoutAnAnswerLeavesNoFile) {
 TEST_F(TraceWorker, StopWithAnErrorDoesNotEndTheWait) {
   const auto session = makeTestSession();
   session->start();
-  facility().failStop(PlatformError{5, "disk gone"});
+  facility().failStop(Error{5, "disk gone"});
   session->stop();
   EXPECT_EQ(errors(), (Strings{"performanceTraceDidStop disk gone", kStopTimedOut}));
   EXPECT_EQ(waits(), std::vector<double>{180});
@@ -338,7 +337,7 @@ TEST_F(TraceWorker, StopWithAnErrorDoesNotEndTheWait) {
 }
 
 TEST_F(TraceWorker, CompletionWithAnErrorLeavesNoTraceToAnalyse) {
-  facility().failCompletion(PlatformError{28, "No space left on device"});
+  facility().failCompletion(Error{28, "No space left on device"});
   play();
   EXPECT_EQ(errors(),
             (Strings{"performanceTraceDidComplete No space left on device", "No traceResults at path: (null)"}));
@@ -349,7 +348,7 @@ TEST_F(TraceWorker, CompletionWithAnErrorLeavesNoTraceToAnalyse) {
 
 TEST_F(TraceWorker, CompletionTakesTheDelegateAway) {
   for (const bool fails : {false, true}) {
-    if (fails) facility().failCompletion(PlatformError{28, "No space left on device"});
+    if (fails) facility().failCompletion(Error{28, "No space left on device"});
     const auto session = makeTestSession();
     session->start();
     EXPECT_TRUE(facility().traces().back().hasDelegate);
