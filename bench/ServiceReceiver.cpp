@@ -23,12 +23,11 @@ ServiceReceiver::ServiceReceiver(const Settings& settings, const ServiceSetup& s
     : service_(settings, setup), request_(makeRequest()) {
   client::Options options;
   options.autoFlushBytes = writes == Writes::OneEach ? 0 : options.autoFlushBytes;
-  client::TarnReportingClient::Connected connected =
-      client::TarnReportingClient::connect(service_.socketPath(), options);
-  if (!connected.client) {
-    fail(connected.error);
+  client::ClientConnection::Connected connected = client::ClientConnection::connect(service_.socketPath(), options);
+  if (connected.failed()) {
+    fail(connected.error->text);
   }
-  client_ = std::move(connected.client);
+  client_ = std::move(connected.value);
   mustBeOk(client_->call(client::createReportingSession(kReporterID)), "creating the session");
   mustBeOk(client_->call(client::setServiceType(kGenericService, kReporterID)), "setting the service type");
   mustBeOk(client_->call(client::setConfiguration({{"HostApplicationDisplayID", "sys.oxbow.music"}}, kReporterID)),

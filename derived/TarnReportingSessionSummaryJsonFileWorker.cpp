@@ -44,11 +44,11 @@ std::string pathStem(const std::string& directory, const TarnReportingSession& s
 }
 
 // Makes an empty file under the first name that is free. `path` is the name that was tried last.
-platform::MaybeError createFile(const std::string& stem, std::string& path) {
+Status createFile(const std::string& stem, std::string& path) {
   platform::FileSystem& files = TarnReportingFacilities().fileSystem;
   path = stem + ".json";
-  platform::MaybeError error = files.createFile(path);
-  for (int number = 2; error && number <= kMostFilesOfOneName && files.exists(path); ++number) {
+  Status error = files.createFile(path);
+  for (int number = 2; error.failed() && number <= kMostFilesOfOneName && files.exists(path); ++number) {
     path = stem + "-" + std::to_string(number) + ".json";
     error = files.createFile(path);
   }
@@ -125,17 +125,17 @@ void TarnReportingSessionSummaryJsonFileWorker::writeMessages(const TarnReportin
 bool TarnReportingSessionSummaryJsonFileWorker::openFile(const TarnReportingSession& session) {
   platform::FileSystem& files = TarnReportingFacilities().fileSystem;
   const std::string directory = TarnReportingLogsDirectory();
-  if (const auto error = files.createDirectories(directory, kDirectoryPermissions)) {
+  if (const auto error = files.createDirectories(directory, kDirectoryPermissions); error.failed()) {
     kLog(LogLevel::Error, "can't create logging directory at %@: %@", directory, error->text);
   }
   std::string path;
-  platform::MaybeError error = createFile(pathStem(directory, session), path);
-  if (!error) {
+  Status error = createFile(pathStem(directory, session), path);
+  if (error.ok()) {
     auto opened = files.openForWriting(path);
     error = std::move(opened.error);
     reportFileHandle_ = std::move(opened.value);
   }
-  if (error) {
+  if (error.failed()) {
     kLog(LogLevel::Error, "SummaryJsonFileWorker failed to open file. action=open file=%@ error=\"%@\"", path,
          error->text);
     setStarted(false);
@@ -149,12 +149,12 @@ bool TarnReportingSessionSummaryJsonFileWorker::openFile(const TarnReportingSess
 
 bool TarnReportingSessionSummaryJsonFileWorker::writeLine(std::string line) {
   line += '\n';
-  const platform::MaybeError error = reportFileHandle_->write(line);
-  if (error) {
+  const Status error = reportFileHandle_->write(line);
+  if (error.failed()) {
     kLog(LogLevel::Error, "SummaryJsonFileWorker failed to write line. action=writeline file=%@ error=\"%@\"",
          reportPath_, error->text);
   }
-  writeFailed_ = error.has_value();
+  writeFailed_ = error.failed();
   return !writeFailed_;
 }
 
@@ -165,7 +165,7 @@ void TarnReportingSessionSummaryJsonFileWorker::closeFile() {
   if (!writeFailed_) {  // after a gap the rest would be worth nothing
     writeLine("]");
   }
-  if (const auto error = reportFileHandle_->close()) {
+  if (const auto error = reportFileHandle_->close(); error.failed()) {
     kLog(LogLevel::Error, "SummaryJsonFileWorker failed to closed file. action=close file=%@ error=\"%@\"", reportPath_,
          error->text);
   } else {

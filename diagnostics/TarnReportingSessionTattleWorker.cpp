@@ -27,8 +27,8 @@ constexpr std::string_view kDisplayReason = "a Parley spatial positioning error 
 constexpr double kSecondsIgnored = 5.0;
 
 // On the prompt service's thread, at any time: the worker may be gone.
-void logCompletion(const platform::MaybeError& error) {
-  if (error) {
+void logCompletion(const Status& error) {
+  if (error.failed()) {
     kLog(LogLevel::Error, "Error creating draft - %@", error->text);
   } else {
     kLog(LogLevel::Info, "Successfully created draft");

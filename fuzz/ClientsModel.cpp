@@ -31,7 +31,8 @@ std::string nameOf(std::uint32_t category, std::uint16_t type) {
 }
 
 Payload comparable(Payload payload) {
-  for (const char* key : {"processuptime_ms", "systemuptime_sec", "tarnreporting_timestamp"}) payload.erase(key);
+  for (const char* key : {"processuptime_ms", "systemuptime_sec", "tarnreporting_timestamp"})
+    payload.erase(key);
   return payload;
 }
 
@@ -65,7 +66,8 @@ std::string applicationOf(const ModelSession& session) {
 
 std::string ClientsModel::textOf(const Payload& payload) {
   std::string text;
-  for (const auto& [key, value] : payload) text += key + "=" + value.view().asText() + ";";
+  for (const auto& [key, value] : payload)
+    text += key + "=" + value.view().asText() + ";";
   return text;
 }
 
@@ -110,7 +112,8 @@ void ClientsModel::configure(const Client& client, const Payload& configuration,
     if (const Session session = own(*client, reporterID)) {
       const auto mirrored = configuration.find("KvHostApplicationDisplayID");
       if (mirrored != configuration.end()) session->configuration["HostApplicationDisplayID"] = mirrored->second;
-      for (const auto& [key, value] : configuration) session->configuration[key] = value;
+      for (const auto& [key, value] : configuration)
+        session->configuration[key] = value;
     }
     answer(reply, "true");
   });
@@ -145,7 +148,8 @@ void ClientsModel::send(ModelRecord message, const Identifiers& reporterIDs, int
       answer(reply, "sys.oxbow.audio.reporting 1");
       return;
     }
-    for (const Session& session : receivers(reporterIDs)) take(*session, message);
+    for (const Session& session : receivers(reporterIDs))
+      take(*session, message);
     answer(reply, "done");
   });
 }
@@ -182,7 +186,8 @@ void ClientsModel::askReporters(int reply) {
   later([=, this] {
     std::string text;
     for (const Client& client : clients_) {
-      for (const Session& session : client->sessions) text += std::to_string(session->reporterID) + ",";
+      for (const Session& session : client->sessions)
+        text += std::to_string(session->reporterID) + ",";
     }
     answer(reply, text);
   });
@@ -332,7 +337,8 @@ void ClientsModel::take(ModelSession& session, ModelRecord message) {
     message.payload["HostApplicationDisplayID"] = applicationOf(session);
   }
   const bool redundant = isRedundant(session, message);
-  for (const auto& [key, value] : message.payload) session.previous[key] = value;
+  for (const auto& [key, value] : message.payload)
+    session.previous[key] = value;
   if (!redundant) session.log.push_back(message);
   const std::string text = std::to_string(session.reporterID) + (session.started ? " started" : "") +
                            (redundant ? " redundant " : " ") + textOf(message.payload);

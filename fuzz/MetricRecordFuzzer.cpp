@@ -5,8 +5,8 @@
 #include <string_view>
 
 #include "diagnostics/pylon/AudioIssueDetected.h"
+#include "diagnostics/pylon/ProtobufText.h"
 #include "diagnostics/pylon/TextFields.h"
-#include "diagnostics/pylon/TextLines.h"
 #include "diagnostics/pylon/WireReader.h"
 #include "diagnostics/pylon/WireWriter.h"
 
@@ -22,7 +22,7 @@ void checkText(const AudioIssueDetected& record) {
   TextFields fields;
   record.formatText(fields, "record");
   check(fields.fields().size() == (record.hasTimestamp() ? 5U : 4U));
-  TextLines lines;
+  ProtobufText lines;
   record.formatText(lines, "record");
   for (const char character : lines.text()) {
     check(character == '\n' || (character >= ' ' && character <= '~'));

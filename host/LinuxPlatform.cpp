@@ -8,8 +8,9 @@
 
 #include "host/log/HostLog.h"
 #include "host/loop/Settling.h"
-#include "host/settings/StateFolder.h"
 #include "host/system/DescriptorLimit.h"
+#include "host/system/Files.h"
+#include "host/system/SystemError.h"
 
 namespace tarn::linux_host {
 
@@ -106,12 +107,12 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
   connections_.gate.setPauseSource([this] { return recorder_.isFull() || workQueues_.isFull(); });
 }
 
-std::string LinuxPlatform::start() {
-  if (!loop_.startError().empty()) {
-    return loop_.startError();
+Status LinuxPlatform::start() {
+  if (loop_.setUp().failed()) {
+    return loop_.setUp();
   }
-  if (const int error = makeFolder(temporaryDirectory_, 0750); error != 0) {
-    return temporaryDirectory_ + errorSuffix(error);
+  if (const Status made = createDirectories(temporaryDirectory_, 0750); made.failed()) {
+    return errorOf(temporaryDirectory_, *made);
   }
   recorder_.start();
   // A large file is read through first; until that is over nothing could be committed in time.
@@ -119,11 +120,11 @@ std::string LinuxPlatform::start() {
   return {};
 }
 
-std::string LinuxPlatform::listen(ListenSocket socket, const std::shared_ptr<platform::ListenerDelegate>& delegate,
-                                  SessionCount sessionCount) {
-  if (std::string error = socket.listen(); !error.empty()) {
+Status LinuxPlatform::listen(ListenSocket socket, const std::shared_ptr<platform::ListenerDelegate>& delegate,
+                             SessionCount sessionCount) {
+  if (Status listening = socket.listen(); listening.failed()) {
     recorder_.shutdown();
-    return error;
+    return listening;
   }
   sessionCount_ = std::move(sessionCount);
   connections_.setStatusSource([this] { return status(); });

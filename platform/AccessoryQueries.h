@@ -3,8 +3,8 @@
 
 #include <cstdint>
 
-#include "platform/Outcome.h"
 #include "plist/Dictionary.h"
+#include "plist/Result.h"
 
 namespace tarn::platform {
 
@@ -15,7 +15,7 @@ class AccessoryQueries {
  public:
   virtual ~AccessoryQueries() = default;
   // Looks for accessories again; how many there are. The indexes below count within the last enumeration.
-  virtual Outcome<std::uint16_t> enumerate() = 0;
+  virtual Result<std::uint16_t> enumerate() = 0;
   // Whether the accessory comes with a charging case. An index beyond the last enumeration has none.
   virtual bool hasCase(std::uint16_t accessoryIndex) const = 0;
   // What is known about a part; empty when there is no such part. The accessory as a whole carries "lastConnectedEpoch"

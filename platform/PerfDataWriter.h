@@ -7,7 +7,7 @@
 #include <memory>
 #include <string_view>
 
-#include "platform/Outcome.h"
+#include "plist/Result.h"
 
 namespace tarn::platform {
 
@@ -28,15 +28,15 @@ class PerfDataWriter {
   // Ends the extension: no member follows.
   virtual void endExtension(Extension extension) = 0;
   // Finishes the file. A writer that is destroyed unclosed leaves no complete file.
-  [[nodiscard]] virtual MaybeError close() = 0;
+  [[nodiscard]] virtual Status close() = 0;
 };
 
 class PerfDataWriters {
  public:
   virtual ~PerfDataWriters() = default;
   // Opens a writer on a new file at `path`, replacing what is there. The error's code is the system's error number.
-  virtual Outcome<std::unique_ptr<PerfDataWriter>> open(std::string_view path, std::string_view name,
-                                                        std::int32_t resultsVersion, std::uint32_t flags) = 0;
+  virtual Result<std::unique_ptr<PerfDataWriter>> open(std::string_view path, std::string_view name,
+                                                       std::int32_t resultsVersion, std::uint32_t flags) = 0;
 };
 
 }  // namespace tarn::platform

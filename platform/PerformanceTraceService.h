@@ -9,7 +9,7 @@
 #include <memory>
 #include <string>
 
-#include "platform/Outcome.h"
+#include "plist/Result.h"
 
 namespace tarn::platform {
 
@@ -22,13 +22,13 @@ class PerformanceTraceDelegate {
  public:
   virtual ~PerformanceTraceDelegate() = default;
   // The trace runs; beside an error it never did.
-  virtual void performanceTraceDidStart(const MaybeError& error) = 0;
+  virtual void performanceTraceDidStart(const Status& error) = 0;
   // It records no more; its file is still to be completed. Beside an error there will be none.
-  virtual void performanceTraceDidStop(const MaybeError& error) = 0;
+  virtual void performanceTraceDidStop(const Status& error) = 0;
   // The file lies complete at `location`. Beside an error the location is empty. The token is the facility's own name
   // for the trace.
   virtual void performanceTraceDidComplete(const std::string& location, const std::string& token,
-                                           const MaybeError& error) = 0;
+                                           const Status& error) = 0;
 };
 
 class PerformanceTraceSession {

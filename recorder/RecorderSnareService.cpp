@@ -24,7 +24,8 @@ std::string freshIdentifier(platform::RandomSource& randomSource) {
   std::string identifier;
   for (const std::size_t group : kGroups) {
     if (!identifier.empty()) identifier += '-';
-    for (std::size_t i = 0; i < group; ++i) identifier += kDigits[randomSource.below(kDigits.size())];
+    for (std::size_t i = 0; i < group; ++i)
+      identifier += kDigits[randomSource.below(kDigits.size())];
   }
   return identifier;
 }

@@ -10,7 +10,8 @@ namespace {
 
 plist::Dictionary payloadOf(const platform::TattleDraft& draft) {
   plist::Array extensions;
-  for (const std::string& identifier : draft.diagnosticExtensions) extensions.append(identifier);
+  for (const std::string& identifier : draft.diagnosticExtensions)
+    extensions.append(identifier);
   const plist::Dictionary component{
       {"name", draft.component.name}, {"version", draft.component.version}, {"identifier", draft.component.identifier}};
   return {{"title", draft.title},

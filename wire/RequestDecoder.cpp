@@ -213,23 +213,23 @@ std::string RequestPass::describe() const {
 
 }  // namespace
 
-DecodeOutcome RequestDecoder::decode(std::span<const std::byte> frame, DecodedRequest& request, Refusal& refusal) {
+DecodeVerdict RequestDecoder::decode(std::span<const std::byte> frame, DecodedRequest& request, Refusal& refusal) {
   request = DecodedRequest{};
   RequestPass pass(frame, request, builder_, keyLists_);
   if (pass.run()) [[likely]] {
-    return DecodeOutcome::Ok;
+    return DecodeVerdict::Ok;
   }
   if (const char* why = checkOneItem(frame)) {
     refusal.text = why;
-    return DecodeOutcome::Unreadable;
+    return DecodeVerdict::Unreadable;
   }
   if (!pass.hasID()) {
     refusal.text = pass.trouble();
-    return DecodeOutcome::Unreadable;
+    return DecodeVerdict::Unreadable;
   }
   refusal.code = pass.code();
   refusal.text = pass.describe();
-  return DecodeOutcome::Refused;
+  return DecodeVerdict::Refused;
 }
 
 }  // namespace tarn::wire

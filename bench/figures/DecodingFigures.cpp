@@ -44,7 +44,7 @@ double toRequest(std::size_t count, const std::string& frame) {
   wire::Refusal refusal;
   const auto bytes = asBytes(frame).subspan(wire::kFrameHeaderBytes);
   return nanosecondsEach(count, [&](std::size_t) {
-    mustHold(decoder.decode(bytes, request, refusal) == wire::DecodeOutcome::Ok);
+    mustHold(decoder.decode(bytes, request, refusal) == wire::DecodeVerdict::Ok);
     keep(&request);
   });
 }

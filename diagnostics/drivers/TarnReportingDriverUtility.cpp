@@ -57,13 +57,13 @@ Name nameOf(const char* text) {
   return text == nullptr ? Name() : Name(text);
 }
 
-std::int64_t codeOf(const platform::MaybeError& error) {
-  return error ? error->code : 0;
+std::int64_t codeOf(const Status& error) {
+  return error.failed() ? error->code : 0;
 }
 
 // Of sampling and of taking a difference alike.
-void logSamplingError(const platform::MaybeError& error) {
-  if (error) {
+void logSamplingError(const Status& error) {
+  if (error.failed()) {
     kLog(LogLevel::Error, "FlumeCreateSamples error %li", error->code);
   }
 }

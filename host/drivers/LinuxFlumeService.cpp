@@ -81,7 +81,7 @@ void subtract(FlumeChannel& later, const FlumeChannel& earlier) {
 
 LinuxFlumeService::LinuxFlumeService(std::vector<FlumeSource*> sources) : sources_(std::move(sources)) {}
 
-platform::Outcome<std::shared_ptr<const FlumeChannelSet>> LinuxFlumeService::copyChannels(
+Result<std::shared_ptr<const FlumeChannelSet>> LinuxFlumeService::copyChannels(
     const std::optional<std::string>& group, const std::optional<std::string>& subGroup) {
   const Reading reading(sources_);
   auto set = std::make_shared<FlumeChannelSet>();
@@ -101,8 +101,8 @@ platform::FlumeService::Subscribed LinuxFlumeService::subscribe(const FlumeChann
   return {std::make_shared<platform::FlumeSubscription>(), std::make_shared<const FlumeChannelSet>(channels), {}};
 }
 
-platform::FlumeService::SamplesOutcome LinuxFlumeService::createSamples(platform::FlumeSubscription&,
-                                                                        const FlumeChannelSet& subscribedChannels) {
+platform::FlumeService::SamplesResult LinuxFlumeService::createSamples(platform::FlumeSubscription&,
+                                                                       const FlumeChannelSet& subscribedChannels) {
   const Reading reading(sources_);
   auto samples = std::make_shared<FlumeSamples>();
   for (const platform::FlumeChannelName& name : subscribedChannels) {
@@ -113,8 +113,8 @@ platform::FlumeService::SamplesOutcome LinuxFlumeService::createSamples(platform
   return {std::move(samples), {}};
 }
 
-platform::FlumeService::SamplesOutcome LinuxFlumeService::createDelta(
-    const std::shared_ptr<const FlumeSamples>& earlier, const std::shared_ptr<const FlumeSamples>& later) {
+platform::FlumeService::SamplesResult LinuxFlumeService::createDelta(const std::shared_ptr<const FlumeSamples>& earlier,
+                                                                     const std::shared_ptr<const FlumeSamples>& later) {
   if (earlier == nullptr || later == nullptr) {
     return {later, {}};
   }

@@ -12,7 +12,7 @@ namespace tarn::linux_host {
 FileLog::FileLog(std::string path, const platform::Clock& clock, platform::LogLevel threshold)
     : LineLog(clock, threshold), path_(std::move(path)) {}
 
-platform::MaybeError FileLog::open() {
+Status FileLog::open() {
   UniqueDescriptor opened(::open(path_.c_str(), O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC | O_NOCTTY, 0640));
   struct stat facts {};
   if (!opened || ::fstat(opened.get(), &facts) != 0) {
@@ -31,7 +31,7 @@ int FileLog::descriptor() {
     return file_.get();
   }
   const auto error = open();
-  if (!error) {
+  if (error.ok()) {
     return file_.get();
   }
   // A file that was only renamed still takes the line; one that was removed would swallow it.

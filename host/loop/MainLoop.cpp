@@ -5,7 +5,7 @@
 #include <cerrno>
 #include <utility>
 
-#include "host/log/HostLog.h"
+#include "host/system/SystemError.h"
 
 namespace tarn::linux_host {
 
@@ -35,13 +35,13 @@ MainLoop::MainLoop(const platform::Clock& clock)
   event.events = EPOLLIN;
   event.data.u64 = tokenOf(queue_->wakeDescriptor(), 0);
   if (!epoll_ || ::epoll_ctl(epoll_.get(), EPOLL_CTL_ADD, queue_->wakeDescriptor(), &event) != 0) {
-    startError_ = "can't set up the main loop" + errorSuffix(errno);
+    setUp_ = errorOf("can't set up the main loop", errno);
   }
 }
 
 MainLoop::~MainLoop() = default;
 
-bool MainLoop::watch(int descriptor, std::uint32_t events, std::shared_ptr<EventHandler> handler) {
+Status MainLoop::watch(int descriptor, std::uint32_t events, std::shared_ptr<EventHandler> handler) {
   const auto index = static_cast<std::size_t>(descriptor);
   if (index >= slots_.size()) {
     slots_.resize(index + 1);
@@ -51,10 +51,10 @@ bool MainLoop::watch(int descriptor, std::uint32_t events, std::shared_ptr<Event
   event.events = events;
   event.data.u64 = tokenOf(descriptor, ++slot.generation);
   if (::epoll_ctl(epoll_.get(), EPOLL_CTL_ADD, descriptor, &event) != 0) {
-    return false;
+    return lastSystemError();
   }
   slot.handler = std::move(handler);
-  return true;
+  return {};
 }
 
 void MainLoop::change(int descriptor, std::uint32_t events) {

@@ -62,7 +62,7 @@ void ServerQueue::wake() {
   bool wakeServer = false;
   {
     const platform::MutexLock lock(mutex_);
-    lookAround_ = true;
+    woken_ = true;
     wakeServer = mustWake();
   }
   if (wakeServer) {
@@ -107,7 +107,7 @@ std::optional<std::chrono::nanoseconds> ServerQueue::prepareToSleep() {
     return nanoseconds::zero();
   }
   const platform::MutexLock lock(mutex_);
-  if (ready() != 0 || std::exchange(lookAround_, false)) {
+  if (ready() != 0 || std::exchange(woken_, false)) {
     return nanoseconds::zero();
   }
   std::optional<nanoseconds> timeout;
@@ -126,7 +126,7 @@ std::optional<std::chrono::nanoseconds> ServerQueue::prepareToSleep() {
 
 bool ServerQueue::prepareToWait() {
   const platform::MutexLock lock(mutex_);
-  if (std::exchange(lookAround_, false)) {
+  if (std::exchange(woken_, false)) {
     return false;
   }
   sleepsUntil_ = {};  // what is delayed stays so

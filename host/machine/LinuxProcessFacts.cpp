@@ -12,8 +12,8 @@
 #include <utility>
 #include <vector>
 
-#include "host/log/HostLog.h"
 #include "host/system/SmallFile.h"
+#include "host/system/SystemError.h"
 #include "wire/Utf8.h"
 
 namespace tarn::linux_host {
@@ -29,7 +29,7 @@ constexpr int kMaximumTripPoints = 64;
 // A kernel file's one line, nothing when it can't be read.
 std::optional<std::string> readLine(const std::string& path) {
   auto [line, error] = readSmallFile(path, kMaximumFactBytes);
-  if (error) {
+  if (error.failed()) {
     return std::nullopt;
   }
   line.resize(std::min(line.find('\n'), line.size()));
@@ -153,7 +153,7 @@ std::optional<std::string> LinuxProcessFacts::processName(std::int32_t processId
   }
   const std::string folder = procRoot_ + "/" + std::to_string(processIdentifier);
   auto [name, error] = readSmallFile(folder + "/comm", kMaximumFactBytes);
-  if (error) {
+  if (error.failed()) {
     return std::nullopt;
   }
   // It may itself hold line ends; the kernel adds one after it.
@@ -171,16 +171,16 @@ std::optional<std::string> LinuxProcessFacts::processName(std::int32_t processId
   return asText(name);
 }
 
-platform::ProcessFacts::Footprint LinuxProcessFacts::physicalFootprint() const {
+Result<std::uint64_t> LinuxProcessFacts::physicalFootprint() const {
   const std::string path = procRoot_ + "/self/status";
   const auto [status, error] = readSmallFile(path, kMaximumFactBytes);
-  if (error) {
-    return {std::nullopt, path + errorSuffix(*error)};
+  if (error.failed()) {
+    return {0, errorOf(path, *error)};
   }
   const std::optional<std::uint64_t> anonymous = statusBytes(status, "RssAnon");
   const std::optional<std::uint64_t> swapped = statusBytes(status, "VmSwap");
   if (!anonymous || !swapped) {
-    return {std::nullopt, path + ": no " + (anonymous ? "VmSwap" : "RssAnon")};
+    return {0, Error{0, path + ": no " + (anonymous ? "VmSwap" : "RssAnon")}};
   }
   return {*anonymous + *swapped, {}};
 }

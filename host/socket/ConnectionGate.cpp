@@ -12,7 +12,7 @@ void ConnectionGate::releaseHeld() {
   const auto waiting = std::exchange(held_, {});
   std::size_t next = 0;
   while (next < waiting.size() && open()) {
-    waiting[next++]->goOn();
+    waiting[next++]->serveHeldRequest();
   }
   held_.insert(held_.begin(), waiting.begin() + static_cast<std::ptrdiff_t>(next), waiting.end());
 }

@@ -22,7 +22,7 @@ class HeldConnection {
  public:
   virtual ~HeldConnection() = default;
   // The gate is open: goes on where it stopped. May be held again.
-  virtual void goOn() = 0;
+  virtual void serveHeldRequest() = 0;
 };
 
 class ConnectionGate {

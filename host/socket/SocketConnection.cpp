@@ -60,7 +60,7 @@ void SocketConnection::watch(std::uint32_t events) {
     host_.loop.unwatch(socket_.get());
   } else if (before != 0) {
     host_.loop.change(socket_.get(), events);
-  } else if (!host_.loop.watch(socket_.get(), events, shared_from_this())) {
+  } else if (host_.loop.watch(socket_.get(), events, shared_from_this()).failed()) {
     watchedEvents_ = 0;
     cut(CutReason::Reset, "can't wait for it" + errorSuffix(errno));
   }
@@ -123,14 +123,14 @@ void SocketConnection::serveFrame(std::span<const std::byte> frame) {
   ++host_.ledger.framesReceived;
   wire::DecodedRequest& request = host_.request;
   switch (host_.decoder.decode(frame, request, host_.refusal)) {
-    case wire::DecodeOutcome::Ok:
+    case wire::DecodeVerdict::Ok:
       serveRequest(request);
       break;
-    case wire::DecodeOutcome::Refused:
+    case wire::DecodeVerdict::Refused:
       host_.ledger.countRefusal(host_.refusal.code);
       sendError(request.id, {wire::kErrorDomain, static_cast<std::int64_t>(host_.refusal.code), host_.refusal.text});
       break;
-    case wire::DecodeOutcome::Unreadable:
+    case wire::DecodeVerdict::Unreadable:
       cut(CutReason::UnreadableFrame, "unreadable frame: " + host_.refusal.text);
       break;
   }
@@ -151,7 +151,7 @@ void SocketConnection::serveRequest(wire::DecodedRequest& request) {
   }
 }
 
-void SocketConnection::goOn() {
+void SocketConnection::serveHeldRequest() {
   if (state_ != State::Open || !heldRequest_) {
     return;
   }

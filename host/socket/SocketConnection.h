@@ -44,7 +44,7 @@ class SocketConnection final : public platform::Connection,
 
   void handleEvents(std::uint32_t events) override;
   void flush() override;
-  void goOn() override;
+  void serveHeldRequest() override;
 
   void sendReply(std::uint64_t id, std::initializer_list<plist::ValueView> results) override;
   void sendNumbers(std::uint64_t id, std::span<const std::int64_t> numbers) override;

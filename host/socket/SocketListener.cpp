@@ -40,7 +40,7 @@ void SocketListener::startAccepting() {
   if (accepting_ || !socket_) {
     return;
   }
-  accepting_ = host_.loop.watch(socket_.descriptor(), EPOLLIN, shared_from_this());
+  accepting_ = host_.loop.watch(socket_.descriptor(), EPOLLIN, shared_from_this()).ok();
   if (!accepting_) {
     pauseAccepting("can't wait for clients" + errorSuffix(errno));
   }

@@ -14,9 +14,9 @@ namespace {
 constexpr std::size_t kMostEntries = 16384;
 }
 
-platform::Outcome<FolderNames> folderNames(const std::string& folder, std::size_t limit,
-                                           const std::function<bool(std::string_view)>& isWanted) {
-  platform::Outcome<FolderNames> found;
+Result<FolderNames> folderNames(const std::string& folder, std::size_t limit,
+                                const std::function<bool(std::string_view)>& isWanted) {
+  Result<FolderNames> found;
   auto& [names, complete] = found.value;
   const std::unique_ptr<DIR, int (*)(DIR*)> directory(::opendir(folder.c_str()), &::closedir);
   if (directory == nullptr) {

@@ -12,9 +12,7 @@
 
 namespace tarn::linux_host {
 
-using platform::Outcome;
-
-Outcome<std::string> readSmallFile(const std::string& path, std::size_t limit) {
+Result<std::string> readSmallFile(const std::string& path, std::size_t limit) {
   // A pipe of this name must not hold us up.
   const UniqueDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
   if (!file) {
@@ -23,7 +21,7 @@ Outcome<std::string> readSmallFile(const std::string& path, std::size_t limit) {
   return readSmallFile(file.get(), limit);
 }
 
-Outcome<std::string> readSmallFile(int descriptor, std::size_t limit) {
+Result<std::string> readSmallFile(int descriptor, std::size_t limit) {
   struct stat facts {};
   if (::fstat(descriptor, &facts) != 0) {
     return {{}, lastSystemError()};

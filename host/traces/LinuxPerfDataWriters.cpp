@@ -15,9 +15,6 @@
 
 namespace tarn::linux_host {
 
-using platform::MaybeError;
-using platform::Outcome;
-
 namespace {
 
 constexpr std::size_t kBlockBytes = std::size_t{64} * 1024;
@@ -86,7 +83,7 @@ class Writer final : public platform::PerfDataWriter {
     open_ = 0;
   }
 
-  MaybeError close() override {
+  Status close() override {
     if (!file_.isOpen()) return systemError(EBADF);
     endExtension(open_);
     text_ += hasValues_ ? "\n  ],\n  \"extensions\": [" : "],\n  \"extensions\": [";
@@ -114,10 +111,10 @@ class Writer final : public platform::PerfDataWriter {
 
 }  // namespace
 
-Outcome<std::unique_ptr<platform::PerfDataWriter>> LinuxPerfDataWriters::open(std::string_view path,
-                                                                              std::string_view name,
-                                                                              std::int32_t resultsVersion,
-                                                                              std::uint32_t flags) {
+Result<std::unique_ptr<platform::PerfDataWriter>> LinuxPerfDataWriters::open(std::string_view path,
+                                                                             std::string_view name,
+                                                                             std::int32_t resultsVersion,
+                                                                             std::uint32_t flags) {
   if (flags != 0) {
     return {nullptr, systemError(EINVAL)};
   }

@@ -19,8 +19,10 @@ namespace {
 using detail::XmlScanner;
 
 std::string_view trimmed(std::string_view text) {
-  while (!text.empty() && detail::isXmlBlank(text.front())) text.remove_prefix(1);
-  while (!text.empty() && detail::isXmlBlank(text.back())) text.remove_suffix(1);
+  while (!text.empty() && detail::isXmlBlank(text.front()))
+    text.remove_prefix(1);
+  while (!text.empty() && detail::isXmlBlank(text.back()))
+    text.remove_suffix(1);
   return text;
 }
 

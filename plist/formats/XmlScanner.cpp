@@ -48,7 +48,8 @@ std::size_t XmlScanner::line() const {
 }
 
 void XmlScanner::skipBlanks() noexcept {
-  while (at_ < text_.size() && isXmlBlank(text_[at_])) ++at_;
+  while (at_ < text_.size() && isXmlBlank(text_[at_]))
+    ++at_;
 }
 
 // Stands at `begin`.
@@ -121,7 +122,8 @@ bool XmlScanner::readStartTag(Tag& tag) {
   if (atEnd()) return fail("the end comes too early");
   if (text_[at_] != '<') return fail("text where an element is wanted");
   const std::size_t begin = ++at_;
-  while (at_ < text_.size() && isNameCharacter(text_[at_])) ++at_;
+  while (at_ < text_.size() && isNameCharacter(text_[at_]))
+    ++at_;
   tag.name = text_.substr(begin, at_ - begin);
   const bool isWhole = atEnd() || isXmlBlank(text_[at_]) || text_[at_] == '/' || text_[at_] == '>';
   if (tag.name.empty() || !isWhole) return fail("a tag that can't be read");

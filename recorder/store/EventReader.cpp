@@ -14,8 +14,6 @@
 
 namespace tarn::recorder {
 
-using platform::MaybeError;
-
 namespace {
 
 constexpr int kBusyMilliseconds = 2000;
@@ -106,7 +104,7 @@ bool EventReader::sameFile(const Identity& now) const noexcept {
   return now.there == opened_.there && now.device == opened_.device && now.inode == opened_.inode;
 }
 
-MaybeError EventReader::openAs(const std::string& name) {
+tarn::Status EventReader::openAs(const std::string& name) {
   if (connection_.open(name, SQLITE_OPEN_READONLY | SQLITE_OPEN_URI) != SQLITE_OK) {
     return lastError();
   }
@@ -132,24 +130,24 @@ void EventReader::setBounds() {
   textLeft_ = kTextOfSmallFile + kTextPerByte * bytes;
 }
 
-platform::PlatformError EventReader::lastError() const {
+Error EventReader::lastError() const {
   return {sqlite3_errcode(connection_.handle()),
           stepsLeft_ < 0 ? "its tables lead into themselves" : connection_.errorText()};
 }
 
-MaybeError EventReader::open() {
+tarn::Status EventReader::open() {
   opened_ = identity();
   asItLies_ = false;
   dataVersion_ = -1;
-  MaybeError error = openAs(file_.string());
-  if (!error) return {};
+  tarn::Status error = openAs(file_.string());
+  if (error.ok()) return {};
   const auto code = error->code & 0xFF;
   // No index can be made in a directory that can't be written to. Where there is no log either, nobody writes, and the
   // file alone is all there is.
   if ((code == SQLITE_CANTOPEN || code == SQLITE_READONLY) && !opened_.hasLog) {
     asItLies_ = true;
     error = openAs(uriOf(file_.string()));
-    if (!error) return {};
+    if (error.ok()) return {};
   }
   connection_.close();
   return error;
@@ -165,7 +163,7 @@ EventReader::Result EventReader::read(const EventQuery& query) {
   if (connection_.isOpen() && !sameFile(now)) connection_.close();
   setBounds();
   if (!connection_.isOpen()) {
-    if (const auto error = open()) return failed(file_.string() + ": " + error->text);
+    if (const auto error = open(); error.failed()) return failed(file_.string() + ": " + error->text);
   }
   Result result = readOpen(query);
   if (result.status == Status::Failed) connection_.close();
@@ -193,12 +191,12 @@ EventReader::Result EventReader::readOpen(const EventQuery& query) {
   after = startingPoint(after);
   const auto error = readRows(query, after, result);
   static_cast<void>(connection_.run("ROLLBACK"));
-  if (error) return failed(file_.string() + ": " + error->text);
+  if (error.failed()) return failed(file_.string() + ": " + error->text);
   lastRead_ = opened_;
   return result;
 }
 
-MaybeError EventReader::readRows(const EventQuery& query, std::int64_t after, Result& result) {
+tarn::Status EventReader::readRows(const EventQuery& query, std::int64_t after, Result& result) {
   std::string sql = "SELECT id, time, backend, name, payload, detail FROM events WHERE id > ?1";
   if (query.backend) sql += " AND backend = ?2";
   if (query.nameGlob) sql += " AND matches_glob(?3, name)";
@@ -212,9 +210,10 @@ MaybeError EventReader::readRows(const EventQuery& query, std::int64_t after, Re
   if (query.nameGlob) rows.bind(3, std::string_view(*query.nameGlob));
   int code = rows.step();
   for (; code == SQLITE_ROW; code = rows.step()) {
-    for (int column = 2; column < 6; ++column) textLeft_ -= static_cast<std::int64_t>(rows.text(column).size());
+    for (int column = 2; column < 6; ++column)
+      textLeft_ -= static_cast<std::int64_t>(rows.text(column).size());
     if (textLeft_ < 0) {
-      return platform::PlatformError{SQLITE_CORRUPT, "its rows say more than it holds"};
+      return Error{SQLITE_CORRUPT, "its rows say more than it holds"};
     }
     result.rows.push_back({rows.integer(0), rows.real(1), std::string(rows.text(2)), std::string(rows.text(3)),
                            std::string(rows.text(4)), std::string(rows.text(5))});

@@ -95,7 +95,8 @@ bool globMatches(std::string_view pattern, std::string_view name) noexcept {
       return false;
     }
   }
-  while (inPattern < pattern.size() && pattern[inPattern] == '*') ++inPattern;
+  while (inPattern < pattern.size() && pattern[inPattern] == '*')
+    ++inPattern;
   return inPattern == pattern.size();
 }
 

@@ -32,13 +32,13 @@ BaseUnit::BaseUnit(platform::AccessoryQueries* queries) : queries_(queries) {
   kLog(LogLevel::Debug, "BaseUnit initialize");
 }
 
-platform::MaybeError BaseUnit::enumerateBluetoothDevices() {
+Status BaseUnit::enumerateBluetoothDevices() {
   kLog(LogLevel::Default, "Enumerate Bluetooth!");
   records_.clear();
   if (queries_ == nullptr) {
     return {};
   }
-  platform::Outcome<std::uint16_t> found = queries_->enumerate();
+  Result<std::uint16_t> found = queries_->enumerate();
   deviceCount_ = found.value;
   return std::move(found.error);
 }

@@ -88,7 +88,7 @@ void TarnReportingRegistrationPublication::_sendMessage(const TarnReportingSessi
       rtcReportingSession_->sendMessage(retrieveRTCReportingCategoryFromCategory(message.category()),
                                         static_cast<std::uint16_t>(message.type()), message.message());
   if (!result.sent) {
-    if (result.error) {
+    if (result.error.failed()) {
       kLog(LogLevel::Error, "error sending message %@", result.error->text);
     }
     return;

@@ -76,7 +76,7 @@ void TarnReportingSessionAudioRegistrationWorker::handleMessage(
 }
 
 void TarnReportingSessionAudioRegistrationWorker::enumerate() {
-  if (const platform::MaybeError error = state_->enumerate()) {
+  if (const Status error = state_->enumerate(); error.failed()) {
     kLog(LogLevel::Debug, "Exception in BT gatherData : %@", error->text);
     state_->scheduleEnumerationCheck(currentEpoch() + kDaySeconds);
     return;

@@ -60,9 +60,9 @@ std::uint64_t TarnReportingTraceRecording::eventsLeftOut() const {
   return eventsLeftOut_;
 }
 
-void TarnReportingTraceRecording::performanceTraceDidStart(const platform::MaybeError& error) {
+void TarnReportingTraceRecording::performanceTraceDidStart(const Status& error) {
   if (const MutexLock lock(*condition_); std::exchange(startTold_, true)) return;
-  if (error) {
+  if (error.failed()) {
     clearTraceSession();
     kLog(LogLevel::Error, "performanceTraceDidStart %@", error->text);
   } else {
@@ -71,9 +71,9 @@ void TarnReportingTraceRecording::performanceTraceDidStart(const platform::Maybe
   TarnReportingUtilitySignal(*condition_, answered_);
 }
 
-void TarnReportingTraceRecording::performanceTraceDidStop(const platform::MaybeError& error) {
+void TarnReportingTraceRecording::performanceTraceDidStop(const Status& error) {
   if (const MutexLock lock(*condition_); std::exchange(stopTold_, true)) return;
-  if (error) {
+  if (error.failed()) {
     clearTraceSession();
     kLog(LogLevel::Error, "performanceTraceDidStop %@", error->text);
   } else {
@@ -82,7 +82,7 @@ void TarnReportingTraceRecording::performanceTraceDidStop(const platform::MaybeE
 }
 
 void TarnReportingTraceRecording::performanceTraceDidComplete(const std::string& location, const std::string&,
-                                                              const platform::MaybeError& error) {
+                                                              const Status& error) {
   if (const MutexLock lock(*condition_); std::exchange(completionTold_, true)) return;
   if (const auto completed = clearTraceSession()) {
     completed->setDelegate({});
@@ -90,7 +90,7 @@ void TarnReportingTraceRecording::performanceTraceDidComplete(const std::string&
     const MutexLock lock(*condition_);
     eventsLeftOut_ = leftOut;
   }
-  if (error) {
+  if (error.failed()) {
     kLog(LogLevel::Error, "performanceTraceDidComplete %@", error->text);
   } else {
     {

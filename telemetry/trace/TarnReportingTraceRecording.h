@@ -42,10 +42,9 @@ class TarnReportingTraceRecording final : public platform::PerformanceTraceDeleg
   // How many events it lacks.
   std::uint64_t eventsLeftOut() const;
 
-  void performanceTraceDidStart(const platform::MaybeError& error) override;
-  void performanceTraceDidStop(const platform::MaybeError& error) override;
-  void performanceTraceDidComplete(const std::string& location, const std::string& token,
-                                   const platform::MaybeError& error) override;
+  void performanceTraceDidStart(const Status& error) override;
+  void performanceTraceDidStop(const Status& error) override;
+  void performanceTraceDidComplete(const std::string& location, const std::string& token, const Status& error) override;
 
  private:
   std::shared_ptr<platform::PerformanceTraceSession> traceSession() const;

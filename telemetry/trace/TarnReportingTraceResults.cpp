@@ -45,7 +45,8 @@ double millisecondsOf(const platform::SignpostInterval& interval) {
 // The library; null when it or a class is missing, and then the process is ending.
 std::shared_ptr<platform::TraceAnalysisLibrary> loadLibrary() {
   const platform::Facilities& facilities = TarnReportingFacilities();
-  if (const auto error = facilities.processEnvironment.set(kAcknowledgementVariable, kAcknowledgement)) {
+  if (const auto error = facilities.processEnvironment.set(kAcknowledgementVariable, kAcknowledgement);
+      error.failed()) {
     kLog(LogLevel::Error, "failed to set %@: %@", kAcknowledgementVariable, error->text);
   }
   platform::TraceAnalysis::Loaded loaded = facilities.traceAnalysis->load();
@@ -125,7 +126,7 @@ bool TarnReportingTraceResults::createPDWriter() {
   if (directory.empty()) {
     directory = files.wellKnownDirectory(platform::WellKnownDirectory::DiagnosticLogs) + "/Audio/Traces";
   }
-  if (const auto error = files.createDirectories(directory, kDirectoryPermissions)) {
+  if (const auto error = files.createDirectories(directory, kDirectoryPermissions); error.failed()) {
     kLog(LogLevel::Error, "can't create logging directory at %@: %@", directory, error->text);
   }
   std::string outputFile(configuredText(configuration, kOutputFileNameKey));
@@ -230,12 +231,12 @@ void TarnReportingTraceResults::writeExtensions() {
 }
 
 void TarnReportingTraceResults::closeAndMove() {
-  if (const auto error = mWriter_->close()) {
+  if (const auto error = mWriter_->close(); error.failed()) {
     kLog(LogLevel::Error, "Failed to close perfdata writer. errno: %d", error->code);
     return;
   }
   kLog(LogLevel::Info, "Moving file from tempWriterPath: %@ to %@", tempWriterPath_, fullWriterPath_);
-  if (TarnReportingFacilities().fileSystem.moveFile(tempWriterPath_, fullWriterPath_)) {
+  if (TarnReportingFacilities().fileSystem.moveFile(tempWriterPath_, fullWriterPath_).failed()) {
     kLog(LogLevel::Error, "Failed to move file");
   }
 }

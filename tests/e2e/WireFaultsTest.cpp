@@ -69,7 +69,7 @@ class WireFaults : public ServiceFixture {
     return count;
   }
 
-  std::unique_ptr<client::TarnReportingClient> bystander_;
+  std::unique_ptr<client::ClientConnection> bystander_;
 };
 
 TEST_F(WireFaults, AnUnknownOperationIsRefusedAndTheConnectionGoesOn) {

@@ -183,7 +183,7 @@ class BannedCalls(unittest.TestCase):
         "Session(const Session&) = delete;", "void operator delete(void* p);", "#include <new>\n",
         "queue.sleep(5);", "renew(5);",
         "auto* p = ::new (memory) Shared;", "int brand(int a);", "platform::exit(1);", "auto n = newest;",
-        '// printf("x")\n', 'auto s = "getenv(";', "std::thread::id id;", "std::time_t t;", "Outcome open(Path path);",
+        '// printf("x")\n', 'auto s = "getenv(";', "std::thread::id id;", "std::time_t t;", "Status open(Path path);",
         "using namespace std::chrono_literals;", "friend class Iterator;", "runtime(nullptr);", "a.free(b);",
     )
 

@@ -113,7 +113,8 @@ class RecorderFixture : public ::testing::Test {
     recorder_->record("tally", name, payload, {}, clock_.epochSeconds());
   }
   void recordMany(int count, std::size_t payloadBytes = 10) {
-    for (int i = 0; i < count; ++i) record("event" + std::to_string(i), {{"text", std::string(payloadBytes, 'x')}});
+    for (int i = 0; i < count; ++i)
+      record("event" + std::to_string(i), {{"text", std::string(payloadBytes, 'x')}});
   }
   bool flush() { return recorder_->flush(kPatience); }
   std::size_t errors() const { return log_.entries(platform::LogLevel::Error).size(); }

@@ -95,7 +95,8 @@ void writeExpectations(const std::string& script, const std::vector<ExpectedEven
     for (auto event = lane.begin(); event != lane.end();) {
       const ExpectedEvent& first = *event;
       json names = json::array();
-      for (; event != lane.end() && areAlike(first, *event); ++event) names.push_back(event->name);
+      for (; event != lane.end() && areAlike(first, *event); ++event)
+        names.push_back(event->name);
       file << lineOf(first, names) << '\n';
     }
   }

@@ -53,7 +53,8 @@ std::vector<RecordedEvent> summaryFiles(const std::string& stateDirectory) {
   const std::filesystem::path directory = stateDirectory + "/DiagnosticLogs/Audio/Reporting";
   std::vector<std::filesystem::path> paths;
   if (std::filesystem::exists(directory)) {
-    for (const auto& entry : std::filesystem::directory_iterator(directory)) paths.push_back(entry.path());
+    for (const auto& entry : std::filesystem::directory_iterator(directory))
+      paths.push_back(entry.path());
   }
   std::sort(paths.begin(), paths.end(), [](const auto& one, const auto& other) { return one.stem() < other.stem(); });
   std::vector<RecordedEvent> files;
@@ -85,17 +86,18 @@ std::vector<RecordedEvent> repliesTo(const std::string& script, const std::strin
           error.is_null() ? json{{"result", reply.at("result")}} : json{{"error", error}}, json::object(), script}});
   }
   std::vector<RecordedEvent> ordered;
-  for (const auto& [line, reply] : replies) ordered.push_back(reply);
+  for (const auto& [line, reply] : replies)
+    ordered.push_back(reply);
   return ordered;
 }
 
 ServiceWatch::ServiceWatch(const std::string& socket, double patienceSeconds) {
   const auto deadline = deadlineIn(patienceSeconds);
   while (!client_) {
-    auto connected = client::TarnReportingClient::connect(socket);
-    client_ = std::move(connected.client);
+    auto connected = client::ClientConnection::connect(socket);
+    client_ = std::move(connected.value);
     if (!client_ && Clock::now() > deadline) {
-      throw std::runtime_error("the service can't be reached: " + connected.error);
+      throw std::runtime_error("the service can't be reached: " + connected.error->text);
     }
     if (!client_) {
       std::this_thread::sleep_for(kPause);

@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-#include "client/TarnReportingClient.h"
+#include "client/ClientConnection.h"
 
 namespace tarn::scenario {
 
@@ -47,7 +47,7 @@ class ServiceWatch {
   json ledgerAtRest(double patienceSeconds, std::size_t leastEvents = 0);
 
  private:
-  std::unique_ptr<client::TarnReportingClient> client_;
+  std::unique_ptr<client::ClientConnection> client_;
 };
 
 }  // namespace tarn::scenario

@@ -14,7 +14,8 @@ namespace {
 class SessionNames {
  public:
   explicit SessionNames(const std::vector<ExpectedEvent>& old) {
-    for (const ExpectedEvent& line : old) taken_.insert(line.detail.value("session", json()));
+    for (const ExpectedEvent& line : old)
+      taken_.insert(line.detail.value("session", json()));
   }
   const json& nameOf(const json& session) {
     json& name = names_[session];

@@ -152,7 +152,8 @@ TEST(ReplyFaults, AReplyOnAnotherThreadRunsWhileTheCallerGoesOn) {
   faults.set(ReplyFault::OtherThread);
 
   faults.deliver([&] {
-    while (!released) std::this_thread::yield();
+    while (!released)
+      std::this_thread::yield();
     repliedOn = std::this_thread::get_id();
   });
   released = true;

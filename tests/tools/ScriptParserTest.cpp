@@ -5,27 +5,21 @@
 #include <filesystem>
 #include <fstream>
 #include <string>
-#include <variant>
+#include <utility>
 
 namespace tarn::script {
 namespace {
 
 ScriptStep parsed(std::string_view text) {
-  auto result = parseLine(text, 7);
-  if (const auto* fault = std::get_if<Fault>(&result)) {
-    ADD_FAILURE() << text << ": " << fault->text;
-    return {};
-  }
-  return std::get<ScriptStep>(result);
+  auto [step, error] = parseLine(text, 7);
+  EXPECT_TRUE(error.ok()) << text << ": " << error.text();
+  return std::move(step);
 }
 
 std::string faultOf(std::string_view text) {
-  const auto result = parseLine(text, 7);
-  if (const auto* fault = std::get_if<Fault>(&result)) {
-    return fault->text;
-  }
-  ADD_FAILURE() << text << " was taken";
-  return {};
+  const Result<ScriptStep> result = parseLine(text, 7);
+  EXPECT_TRUE(result.failed()) << text << " was taken";
+  return result.error.text();
 }
 
 bool contains(const std::string& text, std::string_view part) {
@@ -235,11 +229,10 @@ TEST(ScriptParser, TakesOrRefusesEveryBeginningOfTheSeeds) {
     std::ifstream file(entry.path());
     for (std::string line; std::getline(file, line);) {
       for (std::size_t length = 0; length <= line.size(); ++length) {
-        const auto result = parseLine(std::string_view(line).substr(0, length), 1);
-        const auto* fault = std::get_if<Fault>(&result);
-        ASSERT_TRUE(fault == nullptr || !fault->text.empty()) << entry.path() << ": " << line;
-        ASSERT_TRUE(fault != nullptr || length == line.size()) << "taken: " << line.substr(0, length);
-        taken += fault == nullptr ? 1U : 0U;
+        const Status fault = parseLine(std::string_view(line).substr(0, length), 1).error;
+        ASSERT_TRUE(fault.ok() || !fault->text.empty()) << entry.path() << ": " << line;
+        ASSERT_TRUE(fault.failed() || length == line.size()) << "taken: " << line.substr(0, length);
+        taken += fault.ok() ? 1U : 0U;
       }
     }
   }

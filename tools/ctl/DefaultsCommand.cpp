@@ -56,14 +56,14 @@ int read(const Context& context, const Arguments& arguments) {
   }
   Defaults defaults(context);
   const JsonDefaultsStore::Suite suite = defaults->suite(arguments.suite);
-  if (!suite.fault.empty()) {
-    complain(printable(suite.fault));
+  if (suite.failed()) {
+    complain(printable(suite.error->text));
     return kBadInput;
   }
   if (arguments.wholeSuite) {
-    return print(suite.values, JsonLayout::Indented);
+    return print(suite.value, JsonLayout::Indented);
   }
-  const plist::ValueView value = suite.values.get(arguments.key);
+  const plist::ValueView value = suite.value.get(arguments.key);
   if (!value.present()) {
     complain("there is no key \"" + printable(arguments.key) + "\" in " + printable(arguments.suite));
     return kFailure;
@@ -77,12 +77,12 @@ int store(const Context& context, const Arguments& arguments, const plist::Value
     return kWrongUsage;
   }
   Defaults defaults(context);
-  const bool isBroken = !defaults->suite(arguments.suite).fault.empty();
-  const std::string fault = defaults->store(arguments.suite, arguments.key, value);
-  if (fault.empty()) {
+  const bool isBroken = defaults->suite(arguments.suite).failed();
+  const Status stored = defaults->store(arguments.suite, arguments.key, value);
+  if (stored.ok()) {
     return kSuccess;
   }
-  complain(printable(fault));
+  complain(printable(stored->text));
   return isBroken ? kBadInput : kFailure;
 }
 

@@ -36,11 +36,11 @@ int notify(const Context& context, const Arguments& arguments) {
     return kWrongUsage;
   }
   const linux_host::NotificationFolder notifications(context.stateDirectory + "/notifications");
-  const std::string fault = notifications.post(arguments.name, stateWord(arguments.state));
-  if (fault.empty()) {
+  const Status posted = notifications.post(arguments.name, stateWord(arguments.state));
+  if (posted.ok()) {
     return kSuccess;
   }
-  complain(printable(fault));
+  complain(printable(posted->text));
   return kFailure;
 }
 

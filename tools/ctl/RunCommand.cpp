@@ -6,8 +6,8 @@
 #include <memory>
 #include <string>
 #include <string_view>
-#include <system_error>
 
+#include "host/system/SystemError.h"
 #include "tools/ctl/Command.h"
 #include "tools/ctl/ExitStatus.h"
 #include "tools/ctl/Output.h"
@@ -96,7 +96,7 @@ int run(const Context& context, const std::string& path) {
   }
   const InputFile file(path);
   if (file.fd() < 0) {
-    complain("can't open the script " + printable(path) + ": " + std::generic_category().message(errno));
+    complain(linux_host::errorOf("can't open the script " + printable(path), errno).text);
     return kBadInput;
   }
   Output output(STDOUT_FILENO);

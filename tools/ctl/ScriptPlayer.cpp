@@ -6,11 +6,10 @@
 #include <cerrno>
 #include <iostream>
 #include <limits>
-#include <system_error>
 #include <utility>
-#include <variant>
 #include <vector>
 
+#include "host/system/SystemError.h"
 #include "plist/EscapedText.h"
 #include "plist/formats/Json.h"
 #include "tools/ctl/ExitStatus.h"
@@ -20,9 +19,9 @@ namespace tarn::ctl {
 
 namespace {
 
+using client::ClientConnection;
 using client::Outcome;
 using client::Reply;
-using client::TarnReportingClient;
 using script::ScriptLines;
 using script::ScriptStep;
 
@@ -112,8 +111,8 @@ bool ScriptPlayer::playLines(int fd) {
         if (!waitForInput(fd)) {
           return false;
         }
-        if (!lines.fill()) {
-          return stop(kBadInput, "can't read the script: " + lines.error());
+        if (const Status filled = lines.fill(); filled.failed()) {
+          return stop(kBadInput, "can't read the script: " + filled->text);
         }
         break;
       case ScriptLines::Next::Line:
@@ -130,11 +129,11 @@ bool ScriptPlayer::playLine(std::string_view text, std::size_t line) {
   if (script::isBlank(text)) {
     return true;
   }
-  const auto parsed = script::parseLine(text, line);
-  if (const auto* fault = std::get_if<script::Fault>(&parsed)) {
-    return stop(kBadInput, fault->text);
+  const Result<ScriptStep> parsed = script::parseLine(text, line);
+  if (parsed.failed()) {
+    return stop(kBadInput, parsed.error->text);
   }
-  return playStep(std::get<ScriptStep>(parsed));
+  return playStep(parsed.value);
 }
 
 bool ScriptPlayer::playStep(const ScriptStep& step) {
@@ -261,13 +260,13 @@ ScriptPlayer::Connection* ScriptPlayer::connect(const std::string& name) {
     }
     return &found->second;
   }
-  auto connected = TarnReportingClient::connect(socketPath_, connectionOptions());
-  if (!connected.client) {
-    stop(kUnreachable, "the service can't be reached: " + connected.error);
+  auto connected = ClientConnection::connect(socketPath_, connectionOptions());
+  if (connected.failed()) {
+    stop(kUnreachable, "the service can't be reached: " + connected.error->text);
     return nullptr;
   }
   Connection& connection = connections_[name];
-  connection.client = std::move(connected.client);
+  connection.client = std::move(connected.value);
   connection.client->setLostHandler([&connection](const std::string& why) { connection.lossReason = why; });
   return &connection;
 }
@@ -284,7 +283,7 @@ bool ScriptPlayer::pump(std::optional<Clock::time_point> deadline, int inputFd, 
   polled.push_back({inputFd, POLLIN, 0});  // a negative one is passed over
   const int ready = ::poll(polled.data(), polled.size(), pollTimeout(deadline));
   if (ready < 0 && errno != EINTR) {
-    return stop(kFailure, std::string("can't wait for replies: ") + std::generic_category().message(errno));
+    return stop(kFailure, linux_host::errorOf("can't wait for replies", errno).text);
   }
   for (auto& [name, connection] : connections_) {
     if (connection.client->connected()) {

@@ -104,7 +104,7 @@ DECLARED = re.compile(r"(?<![\w])(?!(?:return|co_return|throw|else|case|do)\s)[\
 
 
 def is_declaration(code, position):
-    """Whether a type stands right before the name, as in `Outcome open(`."""
+    """Whether a type stands right before the name, as in `Status open(`."""
     start = code.rfind("\n", 0, position) + 1
     return DECLARED.search(code[start:position]) is not None
 

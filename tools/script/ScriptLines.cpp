@@ -4,7 +4,8 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <system_error>
+
+#include "host/system/SystemError.h"
 
 namespace tarn::script {
 
@@ -34,7 +35,7 @@ ScriptLines::Next ScriptLines::next(std::string_view& line) {
   return Next::Line;
 }
 
-bool ScriptLines::fill() {
+Status ScriptLines::fill() {
   buffer_.erase(0, begin_);
   scanned_ -= begin_;
   begin_ = 0;
@@ -46,11 +47,10 @@ bool ScriptLines::fill() {
   } while (count < 0 && errno == EINTR);
   buffer_.resize(held + static_cast<std::size_t>(std::max<ssize_t>(count, 0)));
   if (count < 0) {
-    error_ = std::generic_category().message(errno);
-    return false;
+    return linux_host::lastSystemError();
   }
   ended_ = count == 0;
-  return true;
+  return {};
 }
 
 }  // namespace tarn::script

@@ -80,7 +80,7 @@ class LineReader {
   LineReader(const plist::Dictionary& members, ScriptStep& step) : members_(members), step_(step) {}
 
   bool read() { return readOp() && readClient() && checkMembers() && readArguments(); }
-  Fault takeFault() { return Fault{std::move(fault_)}; }
+  Error fault() const { return {0, fault_}; }
 
  private:
   bool fail(std::string what, std::string_view expected) {
@@ -253,25 +253,26 @@ bool LineReader::read(const ArgumentRow& row, Number& number) {
 
 }  // namespace
 
-std::variant<ScriptStep, Fault> parseLine(std::string_view text, std::size_t line) {
+Result<ScriptStep> parseLine(std::string_view text, std::size_t line) {
   // A line's own object is one level more than its values may have.
   const linux_host::JsonReading reading = linux_host::readJson(text, linux_host::kMaximumJsonNesting + 1);
   if (reading.fault) {
-    return Fault{"column " + std::to_string(reading.fault->column) + ": " + reading.fault->text +
-                 ", expected one JSON object a line"};
+    return {{},
+            Error{0, "column " + std::to_string(reading.fault->column) + ": " + reading.fault->text +
+                         ", expected one JSON object a line"}};
   }
   const ValueView object = reading.value;
   if (object.kind() != Kind::Dictionary) {
-    return Fault{"the line is " + shown(object) + ", expected a JSON object: {\"op\": ...}"};
+    return {{}, Error{0, "the line is " + shown(object) + ", expected a JSON object: {\"op\": ...}"}};
   }
   ScriptStep step;
   step.line = line;
   const plist::Dictionary members = object.dictionary();
   LineReader reader(members, step);
   if (!reader.read()) {
-    return reader.takeFault();
+    return {{}, reader.fault()};
   }
-  return step;
+  return {std::move(step), {}};
 }
 
 bool isBlank(std::string_view text) noexcept {

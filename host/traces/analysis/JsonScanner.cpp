@@ -103,7 +103,8 @@ class Scanner {
 
  private:
   void skipBlanks() {
-    while (at_ != end_ && (*at_ == ' ' || *at_ == '\n' || *at_ == '\r' || *at_ == '\t')) ++at_;
+    while (at_ != end_ && (*at_ == ' ' || *at_ == '\n' || *at_ == '\r' || *at_ == '\t'))
+      ++at_;
   }
   bool take(char character) {
     if (at_ == end_ || *at_ != character) return false;
@@ -176,7 +177,8 @@ class Scanner {
   // The text up to the quotation mark, which is taken too.
   bool takeText(std::string_view& text) {
     const char* const begin = at_;
-    while (at_ != end_ && isPlain(*at_)) ++at_;
+    while (at_ != end_ && isPlain(*at_))
+      ++at_;
     text = std::string_view(begin, static_cast<std::size_t>(at_ - begin));
     if (take('"')) return true;
     decoded_.assign(text);
@@ -229,7 +231,8 @@ class Scanner {
 
   bool takeDigits() {
     const char* const begin = at_;
-    while (at_ != end_ && isDigit(*at_)) ++at_;
+    while (at_ != end_ && isDigit(*at_))
+      ++at_;
     return at_ != begin;
   }
   bool takeNumber() {

@@ -146,14 +146,16 @@ class Drawing {
 
   FlumeSamples channels() {
     FlumeSamples drawn(static_cast<std::size_t>(below(12)));
-    for (FlumeChannel& channel : drawn) channel = fresh();
+    for (FlumeChannel& channel : drawn)
+      channel = fresh();
     return drawn;
   }
   // Time passes: channels count on, begin anew, change, vanish and appear.
   FlumeSamples later(FlumeSamples channels) {
     for (FlumeChannel& channel : channels) {
       channel.value += below(7) - 2;
-      for (FlumeBucket& bucket : channel.buckets) bucket.hits = below(6) == 0 ? below(3) : bucket.hits + below(3);
+      for (FlumeBucket& bucket : channel.buckets)
+        bucket.hits = below(6) == 0 ? below(3) : bucket.hits + below(3);
       for (FlumeState& state : channel.states) {
         state.transitions = below(6) == 0 ? 0 : state.transitions + static_cast<std::uint64_t>(below(3));
         state.residency = below(6) == 0 ? 1 : state.residency + static_cast<std::uint64_t>(below(3) * 100);
@@ -186,7 +188,8 @@ class Drawing {
     channel.value = below(100) - 30;
     channel.minimum = below(10) - 5;
     channel.maximum = below(1000);
-    for (int i = below(5); i > 0; --i) channel.buckets.push_back({below(100) - 50, below(100), below(5)});
+    for (int i = below(5); i > 0; --i)
+      channel.buckets.push_back({below(100) - 50, below(100), below(5)});
     std::vector<std::string> names = {"on", "off", "idle", ""};
     for (int i = below(4); i > 0; --i) {
       const std::string name = of(names);

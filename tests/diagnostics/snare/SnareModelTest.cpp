@@ -205,7 +205,8 @@ void SnareModel::asksForWhatTheModelAsksFor() {
     }
   }
   std::vector<std::string> real;
-  for (const auto& call : calls()) real.push_back(lineOf(call));
+  for (const auto& call : calls())
+    real.push_back(lineOf(call));
   EXPECT_GT(real.size(), 1000U);
   ASSERT_EQ(real, world.model.lines);
   const Session session = startedSession(AudioServiceType::Generic);

@@ -30,10 +30,10 @@ namespace tarn::linux_host {
 // Notes the callbacks of a trace down, and may do something in each.
 class TraceDelegate final : public platform::PerformanceTraceDelegate {
  public:
-  void performanceTraceDidStart(const platform::MaybeError& error) override { note("start", error); }
-  void performanceTraceDidStop(const platform::MaybeError& error) override { note("stop", error); }
+  void performanceTraceDidStart(const Status& error) override { note("start", error); }
+  void performanceTraceDidStop(const Status& error) override { note("stop", error); }
   void performanceTraceDidComplete(const std::string& location, const std::string& token,
-                                   const platform::MaybeError& error) override {
+                                   const Status& error) override {
     {
       const std::lock_guard lock(mutex_);
       location_ = location;
@@ -64,8 +64,8 @@ class TraceDelegate final : public platform::PerformanceTraceDelegate {
   }
 
  private:
-  void note(const std::string& name, const platform::MaybeError& error) {
-    const std::string call = error ? name + ": " + error->text : name;
+  void note(const std::string& name, const Status& error) {
+    const std::string call = error.failed() ? name + ": " + error->text : name;
     {
       const std::lock_guard lock(mutex_);
       calls_.push_back(call);

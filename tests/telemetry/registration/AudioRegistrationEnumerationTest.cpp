@@ -12,7 +12,7 @@ using platform::AccessoryPart;
 class NotedQueries final : public platform::AccessoryQueries {
  public:
   explicit NotedQueries(std::uint16_t count) : count_(count) {}
-  platform::Outcome<std::uint16_t> enumerate() override {
+  Result<std::uint16_t> enumerate() override {
     asked_.emplace_back("enumerate");
     return {count_, {}};
   }
@@ -100,7 +100,7 @@ TEST_F(AudioRegistration, BaseUnitWithoutQueriesHasNoDevices) {
   const auto info = std::make_shared<plist::Dictionary>();
   unit.setRegistrationInfoParams(info);
   EXPECT_EQ(unit.RegistrationInfoParams(), info);
-  EXPECT_FALSE(unit.enumerateBluetoothDevices());
+  EXPECT_TRUE(unit.enumerateBluetoothDevices().ok());
   EXPECT_EQ(unit.getDeviceCount(), 0);
   EXPECT_FALSE(unit.isDeviceWithCase(0));
   unit.loadParams(AccessoryPart::Left, 0);
@@ -112,7 +112,7 @@ TEST_F(AudioRegistration, BaseUnitAsksOnlyForDevicesThatItCounted) {
   BaseUnit unit(&platform_.accessories);
   const auto info = std::make_shared<plist::Dictionary>();
   unit.setRegistrationInfoParams(info);
-  ASSERT_FALSE(unit.enumerateBluetoothDevices());
+  ASSERT_TRUE(unit.enumerateBluetoothDevices().ok());
   EXPECT_EQ(unit.getDeviceCount(), 1);
   EXPECT_TRUE(unit.isDeviceWithCase(0));
   unit.loadParams(AccessoryPart::Left, 1);
@@ -136,7 +136,7 @@ TEST_F(AudioRegistration, MinuteAndDayCountFromTheEndOfTheEnumeration) {
   handle(kBuds);
   EXPECT_EQ(stored(kCheckKey), before + 7 + 60);
   platform_.advance(std::chrono::minutes(2));
-  platform_.accessories.failEnumeration(platform::PlatformError{5, "radio is off"});
+  platform_.accessories.failEnumeration(Error{5, "radio is off"});
   const double again = now();
   handle(kBuds);
   EXPECT_EQ(stored(kCheckKey), again + 7 + kDay);
@@ -149,7 +149,7 @@ TEST_F(AudioRegistration, MomentOfTheNextEnumerationIsStoredBeforeTheInfo) {
   EXPECT_EQ(writes[0].key, kCheckKey);
   EXPECT_EQ(writes[1].key, kInfoKey);
   platform_.advance(std::chrono::minutes(2));
-  platform_.accessories.failEnumeration(platform::PlatformError{5, "radio is off"});
+  platform_.accessories.failEnumeration(Error{5, "radio is off"});
   handle(kBuds);
   ASSERT_EQ(platform_.defaults.writes().size(), 3U);
   EXPECT_EQ(platform_.defaults.writes()[2].key, kCheckKey);
@@ -186,7 +186,7 @@ TEST_F(AudioRegistration, FailedEnumerationWaitsForADayAndKeepsTheInfo) {
   handle(kBuds);
   const auto before = state_->registrationInfo();
   platform_.advance(std::chrono::minutes(2));
-  platform_.accessories.failEnumeration(platform::PlatformError{5, "radio is off"});
+  platform_.accessories.failEnumeration(Error{5, "radio is off"});
   platform_.log.clear();
   handle(kBuds);
   EXPECT_EQ(messages().back(), "Exception in BT gatherData : radio is off");

@@ -191,8 +191,7 @@ TEST_F(AudioRegistration, AnEmptyListOfBackendsIsOneAllTheSame) {
 }
 
 TEST_F(AudioRegistration, RefusedMessageIsLoggedAndNotRepeated) {
-  platform_.rtcReporting.refuseMessages(
-      platform::RtcReportingSession::SendResult{false, platform::PlatformError{3, "too large"}});
+  platform_.rtcReporting.refuseMessages(platform::RtcReportingSession::SendResult{false, Error{3, "too large"}});
   makeDue();
   enumerate({buds(now()), buds(now())});
   worker_->stop();

@@ -1,4 +1,4 @@
-#include "client/TarnReportingClient.h"
+#include "client/ClientConnection.h"
 
 #include <algorithm>
 #include <utility>
@@ -9,29 +9,28 @@ namespace tarn::client {
 
 static_assert(Options().maxFrameBytes == wire::kDefaultMaxFrameBytes);
 
-TarnReportingClient::Connected TarnReportingClient::connect(const std::string& path, const Options& options) {
-  Connected connected;
-  Socket socket = Socket::connect(path, connected.errorNumber, connected.error);
-  if (socket.open()) {
-    connected.client = std::make_unique<TarnReportingClient>(std::move(socket), options);
+ClientConnection::Connected ClientConnection::connect(const std::string& path, const Options& options) {
+  Result<Socket> socket = Socket::connect(path);
+  if (socket.failed()) {
+    return {nullptr, std::move(socket.error)};
   }
-  return connected;
+  return {std::make_unique<ClientConnection>(std::move(socket.value), options), {}};
 }
 
-TarnReportingClient::TarnReportingClient(Socket socket, const Options& options)
+ClientConnection::ClientConnection(Socket socket, const Options& options)
     : options_(options), socket_(std::move(socket)), frames_(options.maxReplyBytes) {}
 
-TarnReportingClient::~TarnReportingClient() {
+ClientConnection::~ClientConnection() {
   mustBeOutsideHandlers("destroying the client");
   close();
 }
 
-void TarnReportingClient::setLostHandler(LostHandler handler) {
+void ClientConnection::setLostHandler(LostHandler handler) {
   const OwnerCheck::Use use(owner_);
   lostHandler_ = std::move(handler);
 }
 
-Reply TarnReportingClient::call(const Request& request, std::optional<Milliseconds> timeout) {
+Reply ClientConnection::call(const Request& request, std::optional<Milliseconds> timeout) {
   const OwnerCheck::Use use(owner_);
   mustBeOutsideHandlers("call");
   const Deadline deadline = timeout ? Deadline(Clock::now() + *timeout) : std::nullopt;
@@ -53,7 +52,7 @@ Reply TarnReportingClient::call(const Request& request, std::optional<Millisecon
   return std::move(*answer);
 }
 
-SendStatus TarnReportingClient::send(const Request& request, ReplyHandler handler) {
+SendStatus ClientConnection::send(const Request& request, ReplyHandler handler) {
   const OwnerCheck::Use use(owner_);
   const SendStatus status = sendWithRoom(request, handler);
   if (status == SendStatus::Sent && outgoing_.size() - written_ >= options_.autoFlushBytes) {
@@ -62,7 +61,7 @@ SendStatus TarnReportingClient::send(const Request& request, ReplyHandler handle
   return status;
 }
 
-SendStatus TarnReportingClient::trySend(const Request& request, ReplyHandler handler) {
+SendStatus ClientConnection::trySend(const Request& request, ReplyHandler handler) {
   const OwnerCheck::Use use(owner_);
   SendStatus status = append(request, handler);
   if (status == SendStatus::Full && wantsToWrite()) {
@@ -75,7 +74,7 @@ SendStatus TarnReportingClient::trySend(const Request& request, ReplyHandler han
   return status;
 }
 
-bool TarnReportingClient::flush() {
+bool ClientConnection::flush() {
   const OwnerCheck::Use use(owner_);
   mustBeOutsideHandlers("flush");
   writeSome();
@@ -85,11 +84,11 @@ bool TarnReportingClient::flush() {
   return connected() && !writeBroken_;
 }
 
-std::size_t TarnReportingClient::dispatch() {
+std::size_t ClientConnection::dispatch() {
   return wait(Milliseconds(0));
 }
 
-std::size_t TarnReportingClient::wait(Milliseconds timeout) {
+std::size_t ClientConnection::wait(Milliseconds timeout) {
   const OwnerCheck::Use use(owner_);
   mustBeOutsideHandlers("dispatch or wait");
   const std::size_t before = delivered_;
@@ -100,7 +99,7 @@ std::size_t TarnReportingClient::wait(Milliseconds timeout) {
   return delivered_ - before;
 }
 
-void TarnReportingClient::close() {
+void ClientConnection::close() {
   const OwnerCheck::Use use(owner_);
   socket_.close();
   outgoing_.clear();
@@ -112,7 +111,7 @@ void TarnReportingClient::close() {
 }
 
 // Sends, waiting for room where that is allowed and can come.
-SendStatus TarnReportingClient::sendWithRoom(const Request& request, ReplyHandler& handler) {
+SendStatus ClientConnection::sendWithRoom(const Request& request, ReplyHandler& handler) {
   SendStatus status = append(request, handler);
   const bool isStart = request.operation == wire::Operation::StartReportingSessionForID;
   while (status == SendStatus::Full && !delivering_ && !(isStart && countsAreFull(request))) {
@@ -122,14 +121,14 @@ SendStatus TarnReportingClient::sendWithRoom(const Request& request, ReplyHandle
   return status;
 }
 
-bool TarnReportingClient::countsAreFull(const Request& request) const noexcept {
+bool ClientConnection::countsAreFull(const Request& request) const noexcept {
   return request.operation == wire::Operation::StartReportingSessionForID
              ? pending_.heldCount() >= options_.maxOutstanding
              : pending_.waitingCount() >= options_.maxOutstanding;
 }
 
 // Puts the request in line or leaves everything, the handler too, as it was.
-SendStatus TarnReportingClient::append(const Request& request, ReplyHandler& handler) {
+SendStatus ClientConnection::append(const Request& request, ReplyHandler& handler) {
   if (!connected() || writeBroken_) {
     return SendStatus::NotConnected;
   }
@@ -147,7 +146,7 @@ SendStatus TarnReportingClient::append(const Request& request, ReplyHandler& han
   return SendStatus::Sent;
 }
 
-void TarnReportingClient::writeSome() {
+void ClientConnection::writeSome() {
   while (wantsToWrite() && connected()) {
     const std::ptrdiff_t sent = socket_.sendSome(std::string_view(outgoing_).substr(written_));
     if (sent < 0) {
@@ -165,7 +164,7 @@ void TarnReportingClient::writeSome() {
   }
 }
 
-void TarnReportingClient::readSome(bool mayWait) {
+void ClientConnection::readSome(bool mayWait) {
   while (connected()) {
     const std::span<std::byte> space = frames_.space();
     const std::ptrdiff_t received = socket_.receiveSome(space, mayWait);
@@ -182,7 +181,7 @@ void TarnReportingClient::readSome(bool mayWait) {
   }
 }
 
-void TarnReportingClient::takeFrames() {
+void ClientConnection::takeFrames() {
   std::span<const std::byte> frame;
   wire::DecodedReply decoded;
   std::string reason;
@@ -204,7 +203,7 @@ void TarnReportingClient::takeFrames() {
   }
 }
 
-void TarnReportingClient::takeReply(wire::DecodedReply& decoded) {
+void ClientConnection::takeReply(wire::DecodedReply& decoded) {
   ReplyHandler handler;
   if (!pending_.take(decoded.id, decoded.error.has_value(), handler)) {
     ++unmatchedReplies_;
@@ -221,7 +220,7 @@ void TarnReportingClient::takeReply(wire::DecodedReply& decoded) {
 }
 
 // One round: write what can be, wait, read what is there, deliver.
-void TarnReportingClient::exchange(const Deadline& deadline) {
+void ClientConnection::exchange(const Deadline& deadline) {
   writeSome();
   const bool writing = wantsToWrite();
   if (connected() && !writing && !deadline) {
@@ -239,7 +238,7 @@ void TarnReportingClient::exchange(const Deadline& deadline) {
   deliverLeftOvers();
 }
 
-void TarnReportingClient::deliver(const ReplyHandler& handler, Reply&& reply) {
+void ClientConnection::deliver(const ReplyHandler& handler, Reply&& reply) {
   if (!handler) {
     return;
   }
@@ -249,7 +248,7 @@ void TarnReportingClient::deliver(const ReplyHandler& handler, Reply&& reply) {
   ++delivered_;
 }
 
-void TarnReportingClient::deliverCancelled() {
+void ClientConnection::deliverCancelled() {
   ReplyHandler handler;
   while (pending_.takeCancelled(handler)) {
     deliver(handler, failure(Outcome::Cancelled, "the reply can never come"));
@@ -257,7 +256,7 @@ void TarnReportingClient::deliverCancelled() {
 }
 
 // What became certain without a reply: starts that are never answered, and the end of the connection.
-void TarnReportingClient::deliverLeftOvers() {
+void ClientConnection::deliverLeftOvers() {
   deliverCancelled();
   if (ending_ == Ending::None) {
     return;
@@ -279,7 +278,7 @@ void TarnReportingClient::deliverLeftOvers() {
 }
 
 // The handlers hear of it in deliverLeftOvers, when no other handler is running.
-void TarnReportingClient::lose(std::string why) {
+void ClientConnection::lose(std::string why) {
   socket_.close();
   outgoing_.clear();
   written_ = 0;
@@ -287,7 +286,7 @@ void TarnReportingClient::lose(std::string why) {
   lostWhy_ = std::move(why);
 }
 
-void TarnReportingClient::mustBeOutsideHandlers(const char* operation) const noexcept {
+void ClientConnection::mustBeOutsideHandlers(const char* operation) const noexcept {
   if (delivering_) {
     OwnerCheck::failInsideHandler(operation);
   }
