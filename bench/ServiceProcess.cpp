@@ -58,9 +58,7 @@ void ServiceProcess::waitUntilReady() const {
   for (;;) {
     int errorNumber = 0;
     std::string error;
-    if (client::Socket::connect(socketPath(), errorNumber, error).open()) {
-      return;
-    }
+    if (client::Socket::connect(socketPath(), errorNumber, error).open()) return;
     if (::waitpid(id_, nullptr, WNOHANG) != 0) {
       fail("the service ended at once");
     }

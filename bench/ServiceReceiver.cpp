@@ -58,7 +58,9 @@ void ServiceReceiver::stream(std::size_t count, std::size_t outstanding) {
   failures_ = 0;
   const auto handler = [this](client::Reply&& reply) {
     ++replies_;
-    if (!reply.ok()) ++failures_;
+    if (!reply.ok()) {
+      ++failures_;
+    }
   };
   std::size_t sent = 0;
   while (replies_ < count) {

@@ -11,9 +11,7 @@ static_assert(Options().maxFrameBytes == wire::kDefaultMaxFrameBytes);
 
 ClientConnection::Connected ClientConnection::connect(const std::string& path, const Options& options) {
   Result<Socket> socket = Socket::connect(path);
-  if (socket.failed()) {
-    return {nullptr, std::move(socket.error)};
-  }
+  if (socket.failed()) return {nullptr, std::move(socket.error)};
   return {std::make_unique<ClientConnection>(std::move(socket.value), options), {}};
 }
 
@@ -37,9 +35,7 @@ Reply ClientConnection::call(const Request& request, std::optional<Milliseconds>
   std::optional<Reply> answer;
   ReplyHandler handler = [&answer](Reply&& reply) { answer = std::move(reply); };
   const SendStatus status = sendWithRoom(request, handler);
-  if (status != SendStatus::Sent) {
-    return notSent(status);
-  }
+  if (status != SendStatus::Sent) return notSent(status);
   const std::uint64_t id = nextID_ - 1;
   deliverLeftOvers();
   while (!answer) {
@@ -129,12 +125,8 @@ bool ClientConnection::countsAreFull(const Request& request) const noexcept {
 
 // Puts the request in line or leaves everything, the handler too, as it was.
 SendStatus ClientConnection::append(const Request& request, ReplyHandler& handler) {
-  if (!connected() || writeBroken_) {
-    return SendStatus::NotConnected;
-  }
-  if (countsAreFull(request)) {
-    return SendStatus::Full;
-  }
+  if (!connected() || writeBroken_) return SendStatus::NotConnected;
+  if (countsAreFull(request)) return SendStatus::Full;
   const std::size_t before = outgoing_.size();
   wire::Encoder(outgoing_).request(nextID_, request);
   const bool tooLarge = outgoing_.size() - before - wire::kFrameHeaderBytes > options_.maxFrameBytes;
@@ -174,9 +166,7 @@ void ClientConnection::readSome(bool mayWait) {
     }
     frames_.received(static_cast<std::size_t>(received));
     takeFrames();
-    if (static_cast<std::size_t>(received) < space.size()) {
-      return;
-    }
+    if (static_cast<std::size_t>(received) < space.size()) return;
     mayWait = false;
   }
 }
@@ -239,9 +229,7 @@ void ClientConnection::exchange(const Deadline& deadline) {
 }
 
 void ClientConnection::deliver(const ReplyHandler& handler, Reply&& reply) {
-  if (!handler) {
-    return;
-  }
+  if (!handler) return;
   delivering_ = true;
   handler(std::move(reply));
   delivering_ = false;
@@ -258,9 +246,7 @@ void ClientConnection::deliverCancelled() {
 // What became certain without a reply: starts that are never answered, and the end of the connection.
 void ClientConnection::deliverLeftOvers() {
   deliverCancelled();
-  if (ending_ == Ending::None) {
-    return;
-  }
+  if (ending_ == Ending::None) return;
   const bool lost = std::exchange(ending_, Ending::None) == Ending::Lost;
   for (PendingReplies::Rest& rest : pending_.takeAll()) {
     if (rest.killedService && lost) {

@@ -42,17 +42,13 @@ Result<Socket> Socket::connect(const std::string& path) {
   }
   std::memcpy(address.sun_path, path.data(), path.size());
   Socket socket(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
-  if (!socket.open()) {
-    return failed("cannot make a socket for", path, errno);
-  }
+  if (!socket.open()) return failed("cannot make a socket for", path, errno);
   const auto* generic = reinterpret_cast<const sockaddr*>(&address);
   int result = 0;
   do {
     result = ::connect(socket.fd(), generic, sizeof address);
   } while (result != 0 && errno == EINTR);
-  if (result != 0) {
-    return failed("cannot connect to", path, errno);
-  }
+  if (result != 0) return failed("cannot connect to", path, errno);
   return {std::move(socket), {}};
 }
 
@@ -69,9 +65,7 @@ std::ptrdiff_t Socket::sendSome(std::string_view bytes) noexcept {
 
 std::ptrdiff_t Socket::receiveSome(std::span<std::byte> space, bool mayWait) noexcept {
   const ssize_t received = ::recv(fd_, space.data(), space.size(), mayWait ? 0 : MSG_DONTWAIT);
-  if (received > 0) {
-    return received;
-  }
+  if (received > 0) return received;
   return received < 0 && wouldWait(errno) ? 0 : -1;
 }
 

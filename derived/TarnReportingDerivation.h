@@ -31,13 +31,9 @@ template <class Derive>
 void TarnReportingSendDerivedMessages(const std::shared_ptr<TarnReportingSession>& session,
                                       const TarnReportingLogger& log, const LogText& sendingText,
                                       const Derive& derive) {
-  if (!session || session->messages().empty()) {
-    return;
-  }
+  if (!session || session->messages().empty()) return;
   const TarnReportingSessionMessages derived = derive(std::as_const(*session));
-  if (derived.empty()) {
-    return;
-  }
+  if (derived.empty()) return;
   log(LogLevel::Default, sendingText, session->reporterID());
   for (const auto& message : derived) {
     session->sendMessage(message);

@@ -82,9 +82,7 @@ bool appendObject(std::string& text, const TarnReportingSessionMessage& message,
 
 std::unique_ptr<TarnReportingSessionSummaryJsonFileWorker> TarnReportingSessionSummaryJsonFileWorker::initWithSession(
     const std::shared_ptr<TarnReportingSession>& session) {
-  if (session->serviceType() != AudioServiceType::Test && !TarnReportingUtilityIsInternalBuild()) {
-    return nullptr;
-  }
+  if (session->serviceType() != AudioServiceType::Test && !TarnReportingUtilityIsInternalBuild()) return nullptr;
   auto worker = std::make_unique<TarnReportingSessionSummaryJsonFileWorker>(session);
   worker->setStarted(true);
   return worker;
@@ -92,9 +90,7 @@ std::unique_ptr<TarnReportingSessionSummaryJsonFileWorker> TarnReportingSessionS
 
 void TarnReportingSessionSummaryJsonFileWorker::stop() {
   const std::shared_ptr<TarnReportingSession> owner = session();
-  if (!owner || owner->messages().empty()) {
-    return;
-  }
+  if (!owner || owner->messages().empty()) return;
   writeMessages(*owner);
   closeFile();
 }
@@ -104,20 +100,12 @@ void TarnReportingSessionSummaryJsonFileWorker::writeMessages(const TarnReportin
   std::string lines;
   bool isFirst = true;
   for (const auto& message : session.messages()) {
-    if (message->isRedundant()) {
-      continue;
-    }
-    if (reportPath_.empty() && !openFile(session)) {
-      return;
-    }
+    if (message->isRedundant()) continue;
+    if (reportPath_.empty() && !openFile(session)) return;
     markSessionStarted(*message);
     lines = isFirst ? "" : ",\n";
-    if (!appendObject(lines, *message, counts)) {
-      continue;
-    }
-    if (!writeLine(lines)) {
-      return;
-    }
+    if (!appendObject(lines, *message, counts)) continue;
+    if (!writeLine(lines)) return;
     isFirst = false;
   }
 }
@@ -159,9 +147,7 @@ bool TarnReportingSessionSummaryJsonFileWorker::writeLine(std::string line) {
 }
 
 void TarnReportingSessionSummaryJsonFileWorker::closeFile() {
-  if (!reportFileHandle_) {
-    return;
-  }
+  if (!reportFileHandle_) return;
   if (!writeFailed_) {  // after a gap the rest would be worth nothing
     writeLine("]");
   }

@@ -44,9 +44,7 @@ TarnReportingSessionSystemMonitorWorker::~TarnReportingSessionSystemMonitorWorke
 }
 
 bool TarnReportingSessionSystemMonitorWorker::start() {
-  if (!systemMonitorDictionary_) {
-    return true;
-  }
+  if (!systemMonitorDictionary_) return true;
   for (const plist::Key& feature : featureKeys_) {
     plist::Dictionary state;
     {
@@ -81,9 +79,7 @@ void TarnReportingSessionSystemMonitorWorker::handleChange(const plist::Dictiona
 }
 
 void TarnReportingSessionSystemMonitorWorker::stop() {
-  if (!systemMonitorDictionary_) {
-    return;
-  }
+  if (!systemMonitorDictionary_) return;
   const MutexLock guard(*systemMonitorDictionary_);
   for (const auto observer : std::exchange(observers_, {})) {
     systemMonitorDictionary_->removeObserver(observer);

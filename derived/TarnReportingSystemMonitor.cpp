@@ -198,9 +198,7 @@ void TarnReportingSystemMonitor::featureChanged(const plist::Key& name, std::int
   {
     const MutexLock guard(*systemMonitorDictionary_);
     const plist::Dictionary state = getFeatureState(name.text());
-    if (state.empty() || sameState(state, systemMonitorDictionary_->state(name))) {
-      return;
-    }
+    if (state.empty() || sameState(state, systemMonitorDictionary_->state(name))) return;
     systemMonitorDictionary_->store(name, state);
     kLog(LogLevel::Debug, "Updating value featureName=%@", name.text());
   }
@@ -211,13 +209,9 @@ plist::Dictionary TarnReportingSystemMonitor::getFeatureState(std::string_view n
   kLog(LogLevel::Default, "getting feature %@", name);
   const plist::Dictionary features = this->features();
   const plist::ValueView description = features.get(name);
-  if (description.kind() != plist::Kind::Dictionary) {
-    return {};
-  }
+  if (description.kind() != plist::Kind::Dictionary) return {};
   const plist::Value value = readFeature(name, description.dictionary());
-  if (!value.present()) {
-    return {};
-  }
+  if (!value.present()) return {};
   const platform::Clock& clock = TarnReportingFacilities().clock;
   return {{name, value},
           {kTimestamp, clock.epochSeconds()},

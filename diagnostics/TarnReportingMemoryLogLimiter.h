@@ -22,9 +22,7 @@ class TarnReportingMemoryLogLimiter {
   // Whether a log may be made now, on the monotonic clock; a yes restarts the interval. The first is always a yes.
   bool claim(std::chrono::nanoseconds now) {
     const MutexLock lock(mutex_);
-    if (lastRun_ && now - *lastRun_ <= kInterval) {
-      return false;
-    }
+    if (lastRun_ && now - *lastRun_ <= kInterval) return false;
     lastRun_ = now;
     return true;
   }

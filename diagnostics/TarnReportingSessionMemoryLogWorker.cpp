@@ -38,9 +38,7 @@ bool holds(std::string_view line, std::string_view part) {
 
 // Of the resources of each task those that tell about memory and time, without the tasks that wire nothing.
 bool isResourceLine(std::string_view line) {
-  if (holds(line, " wired_mem ")) {
-    return !holds(line, "wired_mem          0           0           0        none");
-  }
+  if (holds(line, " wired_mem ")) return !holds(line, "wired_mem          0           0           0        none");
   constexpr std::array<std::string_view, 4> kWanted{" cpu_time ", " phys_mem ", " phys_footprint ", "RESOURCE"};
   return std::any_of(kWanted.begin(), kWanted.end(), [line](std::string_view part) { return holds(line, part); });
 }
@@ -171,20 +169,14 @@ void logInBlocks(std::string_view text) {
 
 std::unique_ptr<TarnReportingSessionMemoryLogWorker> TarnReportingSessionMemoryLogWorker::initWithSession(
     const std::shared_ptr<TarnReportingSession>& session) {
-  if (session->serviceType() != AudioServiceType::Test && !TarnReportingUtilityIsInternalBuild()) {
-    return nullptr;
-  }
+  if (session->serviceType() != AudioServiceType::Test && !TarnReportingUtilityIsInternalBuild()) return nullptr;
   return std::make_unique<TarnReportingSessionMemoryLogWorker>(session);
 }
 
 void TarnReportingSessionMemoryLogWorker::handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) {
-  if (message->type() != AudioEventType::MemoryLog) {
-    return;
-  }
+  if (message->type() != AudioEventType::MemoryLog) return;
   const platform::Clock& clock = TarnReportingFacilities().clock;
-  if (!ProcessState::of<TarnReportingMemoryLogLimiter>()->claim(clock.monotonic())) {
-    return;
-  }
+  if (!ProcessState::of<TarnReportingMemoryLogLimiter>()->claim(clock.monotonic())) return;
   const auto zones = startTool(kZones);
   const auto resources = startTool(kResources);
   const auto deadline = clock.monotonic() + kPatience;

@@ -29,8 +29,9 @@ std::vector<std::string>& trail() {
 
 Payload payloadOf(const plist::Dictionary& dictionary) {
   Payload payload;
-  for (const auto& entry : dictionary)
+  for (const auto& entry : dictionary) {
     payload.emplace(entry.key.text(), plist::Value(entry.value));
+  }
   return payload;
 }
 
@@ -122,12 +123,14 @@ class Run {
     platform_.listener.setDelegate(service_);
     platform_.listener.resume();
     platform_.runUntilIdle();
-    for (Peer& peer : peers_)
+    for (Peer& peer : peers_) {
       connect(peer);
+    }
   }
   ~Run() {
-    for (const auto& connection : platform_.listener.connections())
+    for (const auto& connection : platform_.listener.connections()) {
       connection->invalidate();
+    }
     platform_.workQueues.dropAll();
     service_.reset();
   }
@@ -138,7 +141,9 @@ class Run {
     constexpr int kMostSteps = 200;
     for (int done = 0; done < kMostSteps && !bytes_.atEnd(); ++done) {
       step();
-      if (!isHeld_) settle();
+      if (!isHeld_) {
+        settle();
+      }
     }
     settle();
   }
@@ -235,8 +240,9 @@ class Run {
     } else {
       remote.getAllReporters([begin](const auto&, const std::vector<std::int64_t>& reporters) {
         std::string text;
-        for (const std::int64_t reporter : reporters)
+        for (const std::int64_t reporter : reporters) {
           text += std::to_string(reporter) + ",";
+        }
         trail().push_back(begin + text);
       });
       model_.askReporters(reply);
@@ -251,8 +257,9 @@ class Run {
     Identifiers reporterIDs;
     if (const std::size_t count = bytes_.take(4); count > 0) {
       reporterIDs.emplace();
-      for (std::size_t named = 1; named < count; ++named)
+      for (std::size_t named = 1; named < count; ++named) {
         reporterIDs->push_back(bytes_.pick(kIdentifiers));
+      }
     }
     peer.connection->exportedObject()->sendMessage(
         dictionaryOf(message.payload), message.category, message.type, reporterIDs,
@@ -330,8 +337,9 @@ class Run {
   }
   static plist::Dictionary dictionaryOf(const Payload& payload) {
     plist::Dictionary dictionary;
-    for (const auto& [key, value] : payload)
+    for (const auto& [key, value] : payload) {
       dictionary.set(plist::Key(key), value);
+    }
     return dictionary;
   }
 

@@ -19,7 +19,9 @@ using namespace tarn::wire;
 constexpr std::size_t kMaxFrameBytes = 4096;
 
 void check(bool holds) {
-  if (!holds) std::abort();
+  if (!holds) {
+    std::abort();
+  }
 }
 
 void checkFrame(RequestDecoder& decoder, std::span<const std::byte> frame) {

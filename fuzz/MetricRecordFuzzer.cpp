@@ -15,7 +15,9 @@ namespace {
 using namespace pylonmetrics;
 
 void check(bool holds) {
-  if (!holds) std::abort();
+  if (!holds) {
+    std::abort();
+  }
 }
 
 void checkText(const AudioIssueDetected& record) {

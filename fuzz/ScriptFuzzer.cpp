@@ -16,9 +16,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t siz
     const std::size_t end = std::min(rest.find('\n'), rest.size());
     const std::string_view text = rest.substr(0, end);
     rest.remove_prefix(std::min(end + 1, rest.size()));
-    if (isBlank(text)) {
-      continue;
-    }
+    if (isBlank(text)) continue;
     const auto [step, error] = parseLine(text, line);
     const bool isSane = error.failed()
                             ? !error->text.empty()

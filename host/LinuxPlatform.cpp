@@ -108,9 +108,7 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
 }
 
 Status LinuxPlatform::start() {
-  if (loop_.setUp().failed()) {
-    return loop_.setUp();
-  }
+  if (loop_.setUp().failed()) return loop_.setUp();
   if (const Status made = createDirectories(temporaryDirectory_, 0750); made.failed()) {
     return errorOf(temporaryDirectory_, *made);
   }

@@ -51,9 +51,7 @@ Table& table() {
 
 detail::KeyText* makeText(std::string_view text) {
   void* memory = std::malloc(sizeof(detail::KeyText) + text.size());
-  if (memory == nullptr) {
-    throw std::bad_alloc();
-  }
+  if (memory == nullptr) throw std::bad_alloc();
   auto* made = ::new (memory) detail::KeyText{
       {1}, static_cast<std::uint32_t>(text.size()), Key::hashOf(text), text.find(' ') != std::string_view::npos};
   if (!text.empty()) {
@@ -79,16 +77,12 @@ KeyText* internText(std::string_view text) {
 }
 
 void releaseText(KeyText* text) noexcept {
-  if (text == nullptr || !releaseUnlessLast(text->references)) {
-    return;
-  }
+  if (text == nullptr || !releaseUnlessLast(text->references)) return;
   // The last reference goes under the lock, so that nobody finds a text that is about to be freed.
   Table& all = table();
   {
     const MutexLock lock(all.mutex);
-    if (text->references.fetch_sub(1, std::memory_order_acq_rel) != 1) {
-      return;
-    }
+    if (text->references.fetch_sub(1, std::memory_order_acq_rel) != 1) return;
     all.texts.erase(text->text());
   }
   std::free(text);

@@ -38,9 +38,7 @@ std::size_t indexSlots(std::size_t count) {
 }
 
 void buildIndex(KeyListBody* body) {
-  if (body->count <= kLinearLimit) {
-    return;
-  }
+  if (body->count <= kLinearLimit) return;
   const std::size_t slots = indexSlots(body->count);
   body->index = std::make_unique<std::uint32_t[]>(slots);
   body->indexMask = slots - 1;
@@ -58,9 +56,7 @@ std::size_t findIndexed(const KeyListBody& body, std::uint64_t hash, const Match
   std::size_t slot = hash & body.indexMask;
   while (body.index[slot] != 0) {
     const std::size_t position = body.index[slot] - 1;
-    if (matches(body.keys()[position])) {
-      return position;
-    }
+    if (matches(body.keys()[position])) return position;
     slot = (slot + 1) & body.indexMask;
   }
   return KeyList::npos;
@@ -70,9 +66,7 @@ std::size_t findIndexed(const KeyListBody& body, std::uint64_t hash, const Match
 // holds `body`, which holds that list.
 KeyListBody* extendedBefore(const KeyListBody& body, const Key& key) noexcept {
   KeyListBody* const extended = body.extended.load(std::memory_order_acquire);
-  if (extended == nullptr || !(extended->keys()[body.count] == key)) {
-    return nullptr;
-  }
+  if (extended == nullptr || !(extended->keys()[body.count] == key)) return nullptr;
   detail::retainKeyList(extended);
   return extended;
 }
@@ -94,9 +88,7 @@ void destroyBody(KeyListBody* body) noexcept {
 KeyListBody* makeBody(std::span<const Key> head, const Key* last, std::uint64_t hash) {
   const std::size_t count = head.size() + (last != nullptr ? 1 : 0);
   void* memory = std::malloc(sizeof(KeyListBody) + count * sizeof(Key));
-  if (memory == nullptr) {
-    throw std::bad_alloc();
-  }
+  if (memory == nullptr) throw std::bad_alloc();
   auto* body = ::new (memory) KeyListBody{};
   body->references = 1;
   body->count = static_cast<std::uint32_t>(count);
@@ -133,9 +125,7 @@ KeyListBody* internList(std::span<const Key> head, const Key* last, std::uint64_
     return body.count == count && std::equal(head.begin(), head.end(), body.keys()) &&
            (last == nullptr || body.keys()[count - 1] == *last);
   });
-  if (found != nullptr) {
-    return found;
-  }
+  if (found != nullptr) return found;
   KeyListBody* made = makeBody(head, last, hash);
   all.lists.emplace(hash, made);
   return made;
@@ -173,9 +163,7 @@ void releaseKeyList(KeyListBody* body) noexcept {
     Table& all = table();
     {
       const MutexLock lock(all.mutex);
-      if (body->references.fetch_sub(1, std::memory_order_acq_rel) != 1) {
-        return;
-      }
+      if (body->references.fetch_sub(1, std::memory_order_acq_rel) != 1) return;
       const auto [begin, end] = all.lists.equal_range(body->hash);
       all.lists.erase(std::find_if(begin, end, [&](const auto& entry) { return entry.second == body; }));
     }
@@ -210,12 +198,8 @@ std::optional<KeyList> KeyList::make(std::span<const std::string_view> texts) {
 }
 
 std::optional<KeyList> KeyList::make(std::span<const Key> keys) {
-  if (keys.empty()) {
-    return KeyList();
-  }
-  if (hasRepeats(keys)) {
-    return std::nullopt;
-  }
+  if (keys.empty()) return KeyList();
+  if (hasRepeats(keys)) return std::nullopt;
   return KeyList(internList(keys, nullptr, hashOfKeys(keys)));
 }
 
@@ -232,9 +216,7 @@ std::optional<KeyList> KeyList::make(std::span<const Key* const> keys) {
   Table& all = table();
   {
     const MutexLock lock(all.mutex);
-    if (detail::KeyListBody* const found = findList(all, hash, matches)) {
-      return KeyList(found);
-    }
+    if (detail::KeyListBody* const found = findList(all, hash, matches)) return KeyList(found);
   }
   std::vector<Key> held;
   held.reserve(keys.size());
@@ -263,9 +245,7 @@ bool KeyList::hasBlanks() const noexcept {
 }
 
 bool KeyList::hasPrefix(const KeyListBody& body, std::string_view prefix) noexcept {
-  if (prefix.empty()) {
-    return body.count != 0;
-  }
+  if (prefix.empty()) return body.count != 0;
   const auto starts = [prefix](const Key& key) {
     const std::string_view text = key.text_->text();
     // The first character alone rules out most keys.
@@ -289,9 +269,7 @@ std::uint64_t KeyList::combineHash(std::uint64_t hash, std::uint64_t keyHash) no
 }
 
 KeyList KeyList::appending(const Key& key) const {
-  if (KeyListBody* const known = body_ == nullptr ? nullptr : extendedBefore(*body_, key)) {
-    return KeyList(known);
-  }
+  if (KeyListBody* const known = body_ == nullptr ? nullptr : extendedBefore(*body_, key)) return KeyList(known);
   const std::span<const Key> head(body_ == nullptr ? nullptr : body_->keys(), size());
   KeyListBody* const made = internList(head, &key, combineHash(hash(), key.hash()));
   if (body_ != nullptr) {
@@ -309,9 +287,7 @@ KeyList KeyList::removing(std::size_t index) const {
 namespace detail {
 
 std::size_t indexInKeyList(const KeyListBody* body, const Key& key) noexcept {
-  if (body == nullptr) {
-    return KeyList::npos;
-  }
+  if (body == nullptr) return KeyList::npos;
   if (body->index) {
     return findIndexed(*body, key.hash(), [&](const Key& other) { return other == key; });
   }
@@ -321,13 +297,9 @@ std::size_t indexInKeyList(const KeyListBody* body, const Key& key) noexcept {
 }
 
 std::size_t indexInKeyList(const KeyListBody* body, std::string_view text) noexcept {
-  if (body == nullptr) {
-    return KeyList::npos;
-  }
+  if (body == nullptr) return KeyList::npos;
   const auto matches = [&](const Key& other) { return other.text() == text; };
-  if (body->index) {
-    return findIndexed(*body, Key::hashOf(text), matches);
-  }
+  if (body->index) return findIndexed(*body, Key::hashOf(text), matches);
   const Key* const end = body->keys() + body->count;
   const Key* const found = std::find_if(body->keys(), end, matches);
   return found == end ? KeyList::npos : static_cast<std::size_t>(found - body->keys());

@@ -50,9 +50,7 @@ void sendHeldReply(TarnReportingSession& session) {
 }
 
 plist::ValueView textOf(const platform::ReporterIDs& reporterIDs, plist::Array& storage) {
-  if (!reporterIDs) {
-    return {};
-  }
+  if (!reporterIDs) return {};
   for (const std::int64_t reporterID : *reporterIDs) {
     storage.append(reporterID);
   }
@@ -273,9 +271,7 @@ void TarnReportingClientServerInstance::start(std::int64_t reporterID, platform:
 void TarnReportingClientServerInstance::stop(std::int64_t reporterID) {
   kLog(LogLevel::Default, "stopping session for reporter %lli", reporterID);
   trace(kTraceStop, reporterID);
-  if (reporterID == 0) {
-    return;
-  }
+  if (reporterID == 0) return;
   const auto session = findReportingSessionForID(reporterID, false);
   if (session && session->started()) {
     session->stop();
@@ -328,15 +324,11 @@ void TarnReportingClientServerInstance::send(plist::Dictionary message, std::uin
 
 void TarnReportingClientServerInstance::endClient() {
   const auto service = delegate_.lock();
-  if (!service) {
-    return;
-  }
+  if (!service) return;
   const auto& clients = service->getAllClients();
   const bool isListed =
       std::any_of(clients.begin(), clients.end(), [&](const auto& client) { return client.get() == this; });
-  if (!isListed) {
-    return;
-  }
+  if (!isListed) return;
   sessions_.forEach([](std::int64_t, const std::shared_ptr<TarnReportingSession>& session) {
     if (session->started()) {
       session->stop();

@@ -109,9 +109,7 @@ bool TarnReportingService::listenerShouldAcceptNewConnection(const std::shared_p
 
 void TarnReportingService::handleInvalidation(const std::weak_ptr<TarnReportingClientServerInstance>& weakClient) {
   const std::shared_ptr<TarnReportingClientServerInstance> client = weakClient.lock();
-  if (!client) {
-    return;
-  }
+  if (!client) return;
   client->handleConnectionError();
   const std::int64_t uptime = uptimeOf(*client);
   const std::string& name = client->clientProcessName();
@@ -147,9 +145,7 @@ TarnReportingService::Sessions TarnReportingService::getAllActiveReportingSessio
 
 std::shared_ptr<TarnReportingSession> TarnReportingService::findReportingSessionForID(std::int64_t reporterID) {
   const MutexLock lock(mutex_);
-  if (reporterID == 0 || !isReportingEnabled()) {
-    return nullptr;
-  }
+  if (reporterID == 0 || !isReportingEnabled()) return nullptr;
   for (const auto& client : clients_) {
     if (auto session = client->clientReportingSessionMap().find(reporterID)) {
       kLog(LogLevel::Info, "found reporting session %lli for client %i", reporterID, client->processIdentifier());

@@ -49,21 +49,15 @@ std::shared_ptr<TarnReportingService> makeService(platform::Log& log) {
 // Serves until a signal; the exit status.
 int serve(LinuxPlatform& platform, HostSetup& setup) {
   MainLoop& loop = platform.loop();
-  if (const Status started = platform.start(); started.failed()) {
-    return refuse(started->text);
-  }
+  if (const Status started = platform.start(); started.failed()) return refuse(started->text);
   const Status heard = SignalSource::start(setup.signals, loop, [&loop](int) { loop.stop(); });
-  if (heard.failed()) {
-    return refuse(heard->text);
-  }
+  if (heard.failed()) return refuse(heard->text);
   TarnReportingInstallFacilities(&platform.facilities());
   const std::shared_ptr<TarnReportingService> service = makeService(*setup.log);
   // Only now is there anything to connect to: who can reach the service finds it whole, its notifications heard.
   const Status listening =
       platform.listen(std::move(setup.socket), service, [&service] { return service->sessionCount(); });
-  if (listening.failed()) {
-    return refuse(listening->text);
-  }
+  if (listening.failed()) return refuse(listening->text);
   platform.serve();
   return kExitSuccess;
 }
@@ -75,12 +69,8 @@ int main(int argumentCount, char** arguments) {
   using namespace tarn;
   const ServiceCommand command = parseServiceCommand(argumentCount, arguments, HostEnvironment::current());
   std::cout << command.output << std::flush;
-  if (command.usage.failed()) {
-    return refuse(command.usage->text, command.usage->code);
-  }
-  if (!command.options) {
-    return kExitSuccess;
-  }
+  if (command.usage.failed()) return refuse(command.usage->text, command.usage->code);
+  if (!command.options) return kExitSuccess;
   HostSetup setup;
   if (const Status prepared = setup.prepare(*command.options); prepared.failed()) {
     return refuse(prepared->text, prepared->code);

@@ -76,9 +76,7 @@ void TarnReportingSession::addMissingDates(TarnReportingSessionMessage& message)
 
 void TarnReportingSession::removeWhiteSpaceFromKeys(TarnReportingSessionMessage& message) {
   plist::Dictionary& payload = message.mutableMessage();
-  if (!payload.hasKeyWithBlank()) {
-    return;
-  }
+  if (!payload.hasKeyWithBlank()) return;
   // Later entries win over earlier ones of the same new name, and all of them over a key that had no blank.
   std::vector<plist::Key> names;
   names.reserve(payload.size());
@@ -91,9 +89,7 @@ void TarnReportingSession::removeWhiteSpaceFromKeys(TarnReportingSessionMessage&
     }
   }
   for (const plist::Dictionary::Entry& entry : payload) {
-    if (!entry.key.hasBlank()) {
-      continue;
-    }
+    if (!entry.key.hasBlank()) continue;
     names.emplace_back(withoutBlanks(entry.key.text()));
     const auto [place, isNew] = places.emplace(names.back(), entries.size());
     if (isNew) {
@@ -115,21 +111,15 @@ void TarnReportingSession::addAppName(TarnReportingSessionMessage& message) cons
   const MutexLock guard(message);
   plist::Dictionary& payload = message.mutableMessage();
   const plist::ValueView present = payload.get(keys::kHostApplicationDisplayID);
-  if (present && !(present == plist::ValueView("Unknown"))) {
-    return;
-  }
+  if (present && !(present == plist::ValueView("Unknown"))) return;
   payload.set(keys::kHostApplicationDisplayID, TarnReportingUtilityRetrieveAppName(configuration_));
 }
 
 bool TarnReportingSession::messageIsRedundant(const TarnReportingSessionMessage& message) const {
   static const std::array<plist::Key, 3> kIgnored{keys::kProcessUptime, keys::kSystemUptime, keys::kTimestamp};
-  if (message.type() == AudioEventType::Error || message.category() == AudioEventCategory::Error) {
-    return false;
-  }
+  if (message.type() == AudioEventType::Error || message.category() == AudioEventCategory::Error) return false;
   const TarnReportingSessionMessage* const earlier = log_.newest(message.category(), message.type());
-  if (earlier == nullptr || !message.message().equalsIgnoring(earlier->message(), kIgnored)) {
-    return false;
-  }
+  if (earlier == nullptr || !message.message().equalsIgnoring(earlier->message(), kIgnored)) return false;
   kLog(LogLevel::Debug, "marking event redundant");
   return true;
 }

@@ -71,9 +71,7 @@ void TarnReportingSessionSummaryWorker::handleMessage(const std::shared_ptr<Tarn
 
 void TarnReportingSessionSummaryWorker::stop() {
   const std::shared_ptr<TarnReportingSession> owner = session();
-  if (!owner) {
-    return;
-  }
+  if (!owner) return;
   owner->sendMessage(std::make_shared<TarnReportingSessionMessage>(summary(*owner), AudioEventCategory::SessionGeneric,
                                                                    AudioEventType::Summary));
 }

@@ -88,7 +88,9 @@ class FakeFileSystem::OpenFile final : public platform::WritableFile {
     if (auto error = disk_->ordered(Operation::Write); error.failed()) return error;
     const auto fitting = std::min(bytes.size(), disk_->freeBytes.value_or(bytes.size()));
     content_->append(bytes.substr(0, fitting));
-    if (disk_->freeBytes) *disk_->freeBytes -= fitting;
+    if (disk_->freeBytes) {
+      *disk_->freeBytes -= fitting;
+    }
     return fitting == bytes.size() ? Status() : noSpace();
   }
 

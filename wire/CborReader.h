@@ -87,9 +87,7 @@ class CborReader {
 
   template <std::size_t kBytes>
   bool readBigEndian(std::uint64_t& value) noexcept {
-    if (left() < kBytes) {
-      return false;
-    }
+    if (left() < kBytes) return false;
     value = 0;
     for (std::size_t i = 0; i < kBytes; ++i) {
       value = value << 8U | at_[i];

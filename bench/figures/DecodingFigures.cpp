@@ -26,7 +26,9 @@ std::span<const std::byte> asBytes(const std::string& text) {
 }
 
 void mustHold(bool decoded) {
-  if (!decoded) fail("a decoder refused the message");
+  if (!decoded) {
+    fail("a decoder refused the message");
+  }
 }
 
 double toViews(std::size_t count, const std::string& message) {
@@ -66,7 +68,9 @@ double bareWalk(std::size_t count, const std::string& message) {
     std::uint64_t sum = 0;
     while (in.readHead(head)) {
       sum += head.argument;
-      if (head.major == wire::Major::Text) in.readBytes(head.argument, text);
+      if (head.major == wire::Major::Text) {
+        in.readBytes(head.argument, text);
+      }
     }
     keep(sum);
   });

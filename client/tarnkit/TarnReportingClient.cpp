@@ -11,9 +11,7 @@ namespace tarnkit {
 namespace {
 
 tarn::client::ReplyHandler unpacking(ReplyHandler handler) {
-  if (!handler) {
-    return {};
-  }
+  if (!handler) return {};
   return [handler = std::move(handler)](tarn::client::Reply&& reply) {
     handler(tarn::client::unpacked(std::move(reply)));
   };

@@ -163,9 +163,7 @@ void TarnReportingDriverUtility::sendDriverLogsForSession(TarnReportingSession& 
     auto samples = flume_.createSamples(*each.subscription, each.subscribedChannels);
     kLog(LogLevel::Info, "done getting latest samples");
     logSamplingError(samples.error);
-    if (samples.value == nullptr) {
-      continue;
-    }
+    if (samples.value == nullptr) continue;
     const auto earlier = driverSnapShot.find(each.driver.description());
     const auto delta = flume_.createDelta(earlier == driverSnapShot.end() ? nullptr : earlier->second, samples.value);
     logSamplingError(delta.error);
@@ -217,9 +215,7 @@ void TarnReportingDriverUtility::processHistogramData(const FlumeChannel& channe
           std::to_string(bucket.lower) + "-" + std::to_string(bucket.upper) + ":" + std::to_string(bucket.hits) + ";";
     }
   }
-  if (buckets.empty()) {
-    return;
-  }
+  if (buckets.empty()) return;
   buckets.pop_back();
   std::string text = "count=" + std::to_string(channel.buckets.size()) + ",lower=" + std::to_string(lower) +
                      ",upper=" + std::to_string(upper) + ",min=" + std::to_string(channel.minimum) +

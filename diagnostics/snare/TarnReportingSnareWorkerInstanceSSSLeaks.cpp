@@ -54,9 +54,7 @@ bool TarnReportingSnareWorkerInstanceSSSLeaks::interestedInMessage(const TarnRep
 
 void TarnReportingSnareWorkerInstanceSSSLeaks::fire(const TarnReportingSessionMessage& message) {
   const std::shared_ptr<TarnReportingSession> owner = session();
-  if (!owner) {
-    return;
-  }
+  if (!owner) return;
   TarnReportingSnareProcessState::RateLimit& limit = processState_->systemSoundRateLimit();
   const MutexLock guard(limit.lock);
   const double now = TarnReportingFacilities().clock.epochSeconds();

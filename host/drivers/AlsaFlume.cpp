@@ -25,14 +25,10 @@ constexpr std::size_t kMaximumDigits = 4;
 
 // Whether it is the word, a number and, when there is one, one of the letters: "card0", "pcm12p".
 bool isNumbered(std::string_view name, std::string_view word, std::string_view letters = {}) {
-  if (!name.starts_with(word)) {
-    return false;
-  }
+  if (!name.starts_with(word)) return false;
   name.remove_prefix(word.size());
   if (!letters.empty()) {
-    if (name.empty() || letters.find(name.back()) == std::string_view::npos) {
-      return false;
-    }
+    if (name.empty() || letters.find(name.back()) == std::string_view::npos) return false;
     name.remove_suffix(1);
   }
   return !name.empty() && name.size() <= kMaximumDigits &&
@@ -46,17 +42,13 @@ bool isDigitalLink(std::string_view id) {
 }
 
 const char* groupOf(const AlsaInfo& info) {
-  if (!info.isPlayback) {
-    return "Tx";
-  }
+  if (!info.isPlayback) return "Tx";
   return isDigitalLink(info.id) ? "Rx" : "Speaker";
 }
 
 // How far a counter went that may have begun anew.
 std::uint64_t steps(const std::optional<std::uint64_t>& before, const std::optional<std::uint64_t>& now) {
-  if (!now) {
-    return 0;
-  }
+  if (!now) return 0;
   return before && *before <= *now ? *now - *before : *now;
 }
 
@@ -86,9 +78,7 @@ FlumeSamples AlsaFlume::read() {
   for (const Substream& substream : substreams()) {
     const std::string path = substream.path();
     const Status taken = read(substream, sums, samples);
-    if (taken.ok()) {
-      continue;
-    }
+    if (taken.ok()) continue;
     if (const auto before = sums_.find(path); before != sums_.end()) {
       sums.insert(*before);  // it may be readable again
     }
@@ -150,9 +140,7 @@ Status AlsaFlume::read(const Substream& substream, SumsByPath& sums, FlumeSample
   }
   const auto status = parseAlsaStatus(statusFile.value);
   const auto info = parseAlsaInfo(infoFile.value);
-  if (!status || !info) {
-    return Error{0, status ? "tells no direction" : "tells no state"};
-  }
+  if (!status || !info) return Error{0, status ? "tells no direction" : "tells no state"};
   const nanoseconds now = clock_.monotonic();
   const auto before = sums_.find(path);
   Sums& sum = sums.emplace(path, before == sums_.end() ? begun(*status, now) : before->second).first->second;

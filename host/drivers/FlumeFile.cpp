@@ -34,9 +34,7 @@ constexpr std::array<std::pair<std::string_view, FlumeFormat>, 4> kFormats{{{"si
 
 std::optional<FlumeFormat> formatOf(const plist::ValueView& value) {
   for (const auto& [name, format] : kFormats) {
-    if (value.isText() && value.text() == name) {
-      return format;
-    }
+    if (value.isText() && value.text() == name) return format;
   }
   return std::nullopt;
 }
@@ -104,9 +102,7 @@ Status takeStates(const plist::ValueView& value, const FlumeFileBounds& bounds, 
       return wrong(R"(a state must have "name", "transitions", "residency" and "duty_cycle")");
     }
     state.name = std::string(name.text());
-    if (!names.insert(state.name).second) {
-      return wrong("a state stands twice");
-    }
+    if (!names.insert(state.name).second) return wrong("a state stands twice");
     channel.states.push_back(std::move(state));
   }
   return {};
@@ -132,18 +128,12 @@ Status takeNumbers(const plist::Dictionary& members, const FlumeFileBounds& boun
 
 Status takeChannel(const plist::ValueView& item, const FlumeFileBounds& bounds, FlumeChannel& channel) {
   const plist::Dictionary members = item.kind() == plist::Kind::Dictionary ? item.dictionary() : plist::Dictionary();
-  if (!members["name"].isText()) {
-    return wrong("\"name\" must be a text");
-  }
+  if (!members["name"].isText()) return wrong("\"name\" must be a text");
   channel.name.name = std::string(members["name"].text());
   const std::optional<FlumeFormat> format = formatOf(members["format"]);
-  if (!format) {
-    return wrong("\"format\" must be simple, histogram, state or simplearray");
-  }
+  if (!format) return wrong("\"format\" must be simple, histogram, state or simplearray");
   channel.format = *format;
-  if (!take(members["unit"], channel.unit)) {
-    return wrong("\"unit\" must be a text");
-  }
+  if (!take(members["unit"], channel.unit)) return wrong("\"unit\" must be a text");
   return takeNumbers(members, bounds, channel);
 }
 
@@ -151,9 +141,7 @@ Status takeChannel(const plist::ValueView& item, const FlumeFileBounds& bounds, 
 class Complaints {
  public:
   void add(std::size_t number, const FlumeChannel& channel, const Error& complaint) {
-    if (count_++ > 0) {
-      return;
-    }
+    if (count_++ > 0) return;
     first_ = "channel " + std::to_string(number);
     if (channel.name.name && channel.name.name->size() <= kMaximumNameInComplaint) {
       first_ += " \"";
@@ -163,9 +151,7 @@ class Complaints {
     first_ += errorSuffix(complaint);
   }
   Status status() const {
-    if (count_ == 0) {
-      return {};
-    }
+    if (count_ == 0) return {};
     return wrong(count_ > 1 ? first_ + " (" + std::to_string(count_ - 1) + " more)" : first_);
   }
 
@@ -206,12 +192,8 @@ Result<platform::FlumeSamples> takeChannels(const plist::Array& list, const plat
 
 Result<platform::FlumeSamples> parseFlumeFile(std::string_view text, const FlumeFileBounds& bounds) {
   const JsonReading json = readJson(text, kMaximumJsonNesting, JsonNull::Absent);
-  if (json.fault) {
-    return {{}, wrong(json.fault->description())};
-  }
-  if (json.value.kind() != plist::Kind::Dictionary) {
-    return {{}, wrong("must be an object")};
-  }
+  if (json.fault) return {{}, wrong(json.fault->description())};
+  if (json.value.kind() != plist::Kind::Dictionary) return {{}, wrong("must be an object")};
   const plist::Dictionary members = json.value.view().dictionary();
   platform::FlumeChannelName driver;
   if (!members["driver"].isText() || !take(members["driver"], driver.driver)) {
@@ -220,9 +202,7 @@ Result<platform::FlumeSamples> parseFlumeFile(std::string_view text, const Flume
   if (!take(members["group"], driver.group) || !take(members["subgroup"], driver.subGroup)) {
     return {{}, wrong(R"("group" and "subgroup" must be texts)")};
   }
-  if (members["channels"].kind() != plist::Kind::Array) {
-    return {{}, wrong("\"channels\" must be a list")};
-  }
+  if (members["channels"].kind() != plist::Kind::Array) return {{}, wrong("\"channels\" must be a list")};
   return takeChannels(members["channels"].array(), driver, bounds);
 }
 

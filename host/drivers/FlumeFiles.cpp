@@ -74,19 +74,11 @@ Status FlumeFiles::readFile(const std::string& name, Gathered& gathered) const {
   const std::string path = folder_ + "/" + name;
   struct stat facts {};
   // Looked at before it is opened: opening a device can do something.
-  if (::stat(path.c_str(), &facts) != 0) {
-    return unreadable(lastSystemError());
-  }
-  if (!S_ISREG(facts.st_mode)) {
-    return Error{0, "is not a plain file"};
-  }
+  if (::stat(path.c_str(), &facts) != 0) return unreadable(lastSystemError());
+  if (!S_ISREG(facts.st_mode)) return Error{0, "is not a plain file"};
   const auto [content, error] = readSmallFile(path, bounds_.fileBytes);
-  if (error.code() == EFBIG) {
-    return Error{EFBIG, "is larger than " + std::to_string(bounds_.fileBytes) + " bytes"};
-  }
-  if (error.failed()) {
-    return unreadable(*error);
-  }
+  if (error.code() == EFBIG) return Error{EFBIG, "is larger than " + std::to_string(bounds_.fileBytes) + " bytes"};
+  if (error.failed()) return unreadable(*error);
   gathered.bytes += content.size();
   if (gathered.bytes > bounds_.bytes) {
     return Error{0, "is left out: there are more than " + std::to_string(bounds_.bytes) + " bytes of files"};

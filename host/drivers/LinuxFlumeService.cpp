@@ -67,9 +67,7 @@ void subtract(std::vector<FlumeState>& later, const std::vector<FlumeState>& ear
 }
 
 void subtract(FlumeChannel& later, const FlumeChannel& earlier) {
-  if (later.format != earlier.format) {
-    return;
-  }
+  if (later.format != earlier.format) return;
   later.value = difference(later.value, earlier.value);
   for (std::size_t i = 0; i < std::min(later.buckets.size(), earlier.buckets.size()); ++i) {
     later.buckets[i].hits = grown(later.buckets[i].hits, earlier.buckets[i].hits);
@@ -115,9 +113,7 @@ platform::FlumeService::SamplesResult LinuxFlumeService::createSamples(platform:
 
 platform::FlumeService::SamplesResult LinuxFlumeService::createDelta(const std::shared_ptr<const FlumeSamples>& earlier,
                                                                      const std::shared_ptr<const FlumeSamples>& later) {
-  if (earlier == nullptr || later == nullptr) {
-    return {later, {}};
-  }
+  if (earlier == nullptr || later == nullptr) return {later, {}};
   FlumeChannelIndex before;
   addTo(before, *earlier);
   auto delta = std::make_shared<FlumeSamples>(*later);

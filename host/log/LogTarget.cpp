@@ -11,9 +11,7 @@
 namespace tarn::linux_host {
 
 OpenedLog openLog(std::string_view target, platform::LogLevel threshold, const platform::Clock& clock) {
-  if (target == "stderr") {
-    return {std::make_unique<StreamLog>(STDERR_FILENO, clock, threshold), {}};
-  }
+  if (target == "stderr") return {std::make_unique<StreamLog>(STDERR_FILENO, clock, threshold), {}};
   if (target == "journal") {
     if (const auto reason = JournalLog::unavailable(); reason.failed()) {
       return {nullptr, "no journal on this machine: " + reason->text};

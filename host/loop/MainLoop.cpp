@@ -21,9 +21,7 @@ std::uint64_t tokenOf(int descriptor, std::uint32_t generation) {
 // In whole milliseconds, rounded up so that nothing comes early; -1 stands for ever.
 int milliseconds(std::optional<std::chrono::nanoseconds> timeout) {
   constexpr std::chrono::nanoseconds kLongest = std::chrono::hours(1);
-  if (!timeout) {
-    return -1;
-  }
+  if (!timeout) return -1;
   return static_cast<int>(std::chrono::ceil<std::chrono::milliseconds>(std::min(*timeout, kLongest)).count());
 }
 
@@ -50,9 +48,7 @@ Status MainLoop::watch(int descriptor, std::uint32_t events, std::shared_ptr<Eve
   epoll_event event{};
   event.events = events;
   event.data.u64 = tokenOf(descriptor, ++slot.generation);
-  if (::epoll_ctl(epoll_.get(), EPOLL_CTL_ADD, descriptor, &event) != 0) {
-    return lastSystemError();
-  }
+  if (::epoll_ctl(epoll_.get(), EPOLL_CTL_ADD, descriptor, &event) != 0) return lastSystemError();
   slot.handler = std::move(handler);
   return {};
 }
@@ -106,15 +102,11 @@ void MainLoop::waitForEvents() {
 }
 
 void MainLoop::waitUntil(std::chrono::nanoseconds deadline, platform::UniqueFunction<bool()> isOver) {
-  if (std::exchange(waits_, true)) {
-    return;
-  }
+  if (std::exchange(waits_, true)) return;
   while (!isOver() && !stopping_.load(std::memory_order_relaxed)) {
     flushAll();
     const auto left = deadline - clock_.monotonic();
-    if (left <= std::chrono::nanoseconds::zero()) {
-      break;
-    }
+    if (left <= std::chrono::nanoseconds::zero()) break;
     if (queue_->prepareToWait()) {
       Events events;
       const std::size_t count = sleep(events, left);

@@ -103,20 +103,14 @@ bool ServerQueue::refill() {
 
 std::optional<std::chrono::nanoseconds> ServerQueue::prepareToSleep() {
   using std::chrono::nanoseconds;
-  if (ready() != 0) {
-    return nanoseconds::zero();
-  }
+  if (ready() != 0) return nanoseconds::zero();
   const platform::MutexLock lock(mutex_);
-  if (ready() != 0 || std::exchange(woken_, false)) {
-    return nanoseconds::zero();
-  }
+  if (ready() != 0 || std::exchange(woken_, false)) return nanoseconds::zero();
   std::optional<nanoseconds> timeout;
   sleepsUntil_ = nanoseconds::max();
   if (!delayed_.empty()) {
     const auto now = clock_.monotonic();
-    if (delayed_.due(now)) {
-      return nanoseconds::zero();
-    }
+    if (delayed_.due(now)) return nanoseconds::zero();
     sleepsUntil_ = delayed_.deadline();
     timeout = sleepsUntil_ - now;
   }
@@ -126,9 +120,7 @@ std::optional<std::chrono::nanoseconds> ServerQueue::prepareToSleep() {
 
 bool ServerQueue::prepareToWait() {
   const platform::MutexLock lock(mutex_);
-  if (std::exchange(woken_, false)) {
-    return false;
-  }
+  if (std::exchange(woken_, false)) return false;
   sleepsUntil_ = {};  // what is delayed stays so
   sleeping_ = true;
   return true;

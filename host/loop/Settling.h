@@ -14,9 +14,7 @@ template <class Queues>
   std::size_t left = queues.unfinished();
   while (!queues.settle(longest)) {
     const std::size_t before = std::exchange(left, queues.unfinished());
-    if (left >= before) {
-      return left;
-    }
+    if (left >= before) return left;
   }
   return 0;
 }

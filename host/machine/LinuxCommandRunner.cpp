@@ -68,7 +68,9 @@ class RunningShell final : public platform::RunningCommand {
       kill();
       reap(0);
     }
-    if (timedOut_) end_ = {CommandEnd::Kind::TimedOut, 0};
+    if (timedOut_) {
+      end_ = {CommandEnd::Kind::TimedOut, 0};
+    }
     return end_;
   }
 
@@ -92,7 +94,9 @@ class RunningShell final : public platform::RunningCommand {
           unread_.append(block.data(), static_cast<std::size_t>(got));
           return true;
         }
-        if (got == 0 || errno != EINTR) output_.reset();
+        if (got == 0 || errno != EINTR) {
+          output_.reset();
+        }
       } else if (ready == 0 && wait == 0) {
         timedOut_ = true;
         output_.reset();

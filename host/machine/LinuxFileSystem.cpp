@@ -101,7 +101,9 @@ Result<std::unique_ptr<platform::WritableFile>> LinuxFileSystem::openForWriting(
 
 Result<std::string> LinuxFileSystem::readFile(std::string_view path, std::size_t mostBytes) {
   auto file = readSmallFile(std::string(path), mostBytes);
-  if (file.failed()) file.value.clear();
+  if (file.failed()) {
+    file.value.clear();
+  }
   return file;
 }
 

@@ -31,12 +31,8 @@ FileNotificationCenter::FileNotificationCenter(std::string folder, MainLoop& loo
 
 platform::NotificationCenter::Registration FileNotificationCenter::registerFor(
     std::string_view name, std::shared_ptr<platform::WorkQueue> queue, Handler handler) {
-  if (!isPlainName(name)) {
-    return {EINVAL, -1};
-  }
-  if (entries_.size() == kMaximumRegistrations) {
-    return {ENOSPC, -1};
-  }
+  if (!isPlainName(name)) return {EINVAL, -1};
+  if (entries_.size() == kMaximumRegistrations) return {ENOSPC, -1};
   if (const Status watching = watched_ ? Status() : startWatching(); watching.failed()) {
     return {static_cast<std::int32_t>(watching->code), -1};
   }
@@ -69,21 +65,15 @@ bool FileNotificationCenter::post(std::string_view name, std::optional<std::uint
 
 Status FileNotificationCenter::startWatching() {
   events_ = UniqueDescriptor(::inotify_init1(IN_CLOEXEC | IN_NONBLOCK));
-  if (!events_) {
-    return lastSystemError();
-  }
-  if (Status watching = watchFolder(); watching.failed()) {
-    return watching;
-  }
+  if (!events_) return lastSystemError();
+  if (Status watching = watchFolder(); watching.failed()) return watching;
   Status watching = loop_.watch(events_.get(), EPOLLIN, shared_from_this());
   watched_ = watching.ok();
   return watching;
 }
 
 Status FileNotificationCenter::watchFolder() {
-  if (Status made = folder_.make(); made.failed()) {
-    return made;
-  }
+  if (Status made = folder_.make(); made.failed()) return made;
   watch_ = ::inotify_add_watch(events_.get(), folder_.path().c_str(),
                                kPosts | IN_DELETE_SELF | IN_MOVE_SELF | IN_ONLYDIR | IN_EXCL_UNLINK);
   return watch_ < 0 ? lastSystemError() : Status();
@@ -93,9 +83,7 @@ Status FileNotificationCenter::watchFolder() {
 void FileNotificationCenter::handleEvents(std::uint32_t) {
   alignas(inotify_event) std::array<char, 16384> buffer;
   const ssize_t length = ::read(events_.get(), buffer.data(), buffer.size());
-  if (length <= 0) {
-    return;
-  }
+  if (length <= 0) return;
   const auto end = static_cast<std::size_t>(length);
   for (std::size_t at = 0; at + sizeof(inotify_event) <= end;) {
     inotify_event event{};
@@ -149,9 +137,7 @@ void FileNotificationCenter::deliverAll() {
 }
 
 void FileNotificationCenter::handOver(const std::shared_ptr<Entry>& entry) {
-  if (std::exchange(entry->waiting, true)) {
-    return;
-  }
+  if (std::exchange(entry->waiting, true)) return;
   entry->queue->async([entry] {
     entry->waiting = false;
     if (!entry->cancelled) {

@@ -46,13 +46,9 @@ Status take(const toml::node& node, std::string& setting) {
 Status take(const toml::node& node, std::optional<platform::SnareReason>& reason) {
   constexpr auto& kNames = platform::kSnareReasonNames;
   std::string name;
-  if (Status taken = take(node, name); taken.failed()) {
-    return taken;
-  }
+  if (Status taken = take(node, name); taken.failed()) return taken;
   const auto* const found = std::find(kNames.begin(), kNames.end(), name);
-  if (found == kNames.end()) {
-    return name.empty() ? Status() : wrong("must be the name of a reason code, or empty");
-  }
+  if (found == kNames.end()) return name.empty() ? Status() : wrong("must be the name of a reason code, or empty");
   reason = static_cast<platform::SnareReason>(found - kNames.begin());
   return {};
 }
@@ -76,9 +72,7 @@ Status take(const toml::node& node, std::vector<std::string>& setting) {
       }
     }
   }
-  if (items == nullptr || texts.size() != items->size()) {
-    return wrong("must be a list of texts");
-  }
+  if (items == nullptr || texts.size() != items->size()) return wrong("must be a list of texts");
   setting = std::move(texts);
   return {};
 }
@@ -137,18 +131,14 @@ constexpr std::array<Setting, 13> kSettings{{
 
 bool isSection(std::string_view name) {
   for (const Setting& setting : kSettings) {
-    if (setting.section == name) {
-      return true;
-    }
+    if (setting.section == name) return true;
   }
   return false;
 }
 
 const Setting* findSetting(std::string_view section, std::string_view key) {
   for (const Setting& setting : kSettings) {
-    if (setting.section == section && setting.key == key) {
-      return &setting;
-    }
+    if (setting.section == section && setting.key == key) return &setting;
   }
   return nullptr;
 }
@@ -219,9 +209,7 @@ Result<HostConfiguration> parseConfiguration(std::string_view text, std::string_
   } else {
     fault = {parsed.error().source().begin.line, std::string(parsed.error().description())};
   }
-  if (fault.text.empty()) {
-    return {std::move(configuration), {}};
-  }
+  if (fault.text.empty()) return {std::move(configuration), {}};
   std::string error = std::string(name) + ":" + std::to_string(fault.line) + ": ";
   plist::appendEscapedControls(error, fault.text);  // keys may hold line ends, an error is one line
   return {{}, Error{0, std::move(error)}};
@@ -229,9 +217,7 @@ Result<HostConfiguration> parseConfiguration(std::string_view text, std::string_
 
 Result<HostConfiguration> readConfiguration(const std::string& path) {
   const auto file = readSmallFile(path, kMaximumFileBytes);
-  if (file.failed()) {
-    return {{}, errorOf(path, *file.error)};
-  }
+  if (file.failed()) return {{}, errorOf(path, *file.error)};
   return parseConfiguration(file.value, path);
 }
 

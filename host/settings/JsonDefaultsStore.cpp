@@ -34,9 +34,7 @@ std::int64_t nanoseconds(const timespec& time) {
 
 JsonDefaultsStore::Suite parsed(const std::string& path, std::string_view text) {
   const JsonReading reading = readJson(text, kMaximumJsonNesting, JsonNull::Absent);
-  if (reading.fault) {
-    return {{}, Error{0, path + ":" + reading.fault->description()}};
-  }
+  if (reading.fault) return {{}, Error{0, path + ":" + reading.fault->description()}};
   if (reading.value.kind() != plist::Kind::Dictionary) {
     return {{}, Error{0, path + ":1:1: a defaults file holds one JSON object"}};
   }
@@ -66,9 +64,7 @@ bool JsonDefaultsStore::setValue(std::string_view suiteName, std::string_view ke
 }
 
 JsonDefaultsStore::Suite JsonDefaultsStore::suite(std::string_view name) const {
-  if (!isPlainName(name)) {
-    return {};
-  }
+  if (!isPlainName(name)) return {};
   const std::string path = pathOf(name);
   struct stat facts {};
   const Stamp now = stampOf(::stat(path.c_str(), &facts), facts);
@@ -90,18 +86,12 @@ JsonDefaultsStore::Suite JsonDefaultsStore::suite(std::string_view name) const {
 }
 
 Status JsonDefaultsStore::store(std::string_view suiteName, std::string_view key, const plist::ValueView& value) {
-  if (!isPlainName(suiteName)) {
-    return Error{EINVAL, "\"" + std::string(suiteName) + "\" can't name a suite"};
-  }
+  if (!isPlainName(suiteName)) return Error{EINVAL, "\"" + std::string(suiteName) + "\" can't name a suite"};
   const std::string path = pathOf(suiteName);
-  if (const Status made = createDirectories(folder_, kFolderMode); made.failed()) {
-    return errorOf(folder_, *made);
-  }
+  if (const Status made = createDirectories(folder_, kFolderMode); made.failed()) return errorOf(folder_, *made);
   FileLock writers;
   const std::string lock = folder_ + "/.lock";
-  if (const Status taken = writers.take(lock, lockPatience_); taken.failed()) {
-    return errorOf(lock, *taken);
-  }
+  if (const Status taken = writers.take(lock, lockPatience_); taken.failed()) return errorOf(lock, *taken);
   Stamp stamp;
   Suite current = read(path, stamp);
   if (current.failed()) {
@@ -113,9 +103,7 @@ Status JsonDefaultsStore::store(std::string_view suiteName, std::string_view key
     return {};
   }
   const std::optional<std::string> text = jsonText(current.value, JsonLayout::Indented);
-  if (!text) {
-    return Error{0, "the value of \"" + std::string(key) + "\" has no JSON form"};
-  }
+  if (!text) return Error{0, "the value of \"" + std::string(key) + "\" has no JSON form"};
   if (text->size() > kMaximumFileBytes) {
     return Error{EFBIG, path + " would be larger than " + std::to_string(kMaximumFileBytes) + " bytes"};
   }
@@ -128,9 +116,7 @@ std::string JsonDefaultsStore::pathOf(std::string_view suiteName) const {
 }
 
 JsonDefaultsStore::Stamp JsonDefaultsStore::stampOf(int result, const struct stat& facts) {
-  if (result != 0) {
-    return {false, errno, 0, 0, 0, 0, 0};
-  }
+  if (result != 0) return {false, errno, 0, 0, 0, 0, 0};
   return {true, 0, facts.st_dev, facts.st_ino, facts.st_size, nanoseconds(facts.st_mtim), nanoseconds(facts.st_ctim)};
 }
 
@@ -152,21 +138,15 @@ JsonDefaultsStore::Suite JsonDefaultsStore::read(const std::string& path, Stamp&
   }
   stamp = stampOf(::fstat(file.get(), &facts), facts);
   const auto content = readSmallFile(file.get(), kMaximumFileBytes);
-  if (content.failed()) {
-    return {{}, errorOf(path, *content.error)};
-  }
+  if (content.failed()) return {{}, errorOf(path, *content.error)};
   return parsed(path, content.value);
 }
 
 void JsonDefaultsStore::logFault(Cached& cached) const {
   const Status& read = cached.suite.error;
-  if (read == cached.logged && (read.ok() || cached.stamp == cached.loggedStamp)) {
-    return;
-  }
+  if (read == cached.logged && (read.ok() || cached.stamp == cached.loggedStamp)) return;
   cached.logged = read;
-  if (read.ok()) {
-    return;
-  }
+  if (read.ok()) return;
   cached.loggedStamp = cached.stamp;
   hostLog(log_, kHostCategory, platform::LogLevel::Error, kModule,
           "defaults file is broken and reads as empty: " + read->text);

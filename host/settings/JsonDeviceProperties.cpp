@@ -22,13 +22,9 @@ JsonDeviceProperties::JsonDeviceProperties() : properties_{{"InternalBuild", fal
 
 Status JsonDeviceProperties::load(const std::string& path) {
   const auto file = readSmallFile(path, kMaximumFileBytes);
-  if (file.failed()) {
-    return errorOf(path, *file.error);
-  }
+  if (file.failed()) return errorOf(path, *file.error);
   const JsonReading reading = readJson(file.value);
-  if (reading.fault) {
-    return Error{0, path + ":" + reading.fault->description()};
-  }
+  if (reading.fault) return Error{0, path + ":" + reading.fault->description()};
   if (reading.value.kind() != plist::Kind::Dictionary) {
     return Error{0, path + ":1:1: device properties are one JSON object"};
   }

@@ -47,9 +47,7 @@ Status writeWord(int file, std::uint64_t word) {
     word >>= 8U;
   }
   const ssize_t written = ::pwrite(file, bytes.data(), bytes.size(), 0);
-  if (written < 0) {
-    return lastSystemError();
-  }
+  if (written < 0) return lastSystemError();
   return written == static_cast<ssize_t>(bytes.size()) ? Status() : systemError(ENOSPC);
 }
 
@@ -66,20 +64,14 @@ std::optional<std::uint64_t> NotificationFolder::state(std::string_view name) co
 }
 
 Status NotificationFolder::post(std::string_view name, std::optional<std::uint64_t> state) const {
-  if (!isPlainName(name)) {
-    return Error{EINVAL, "\"" + std::string(name) + "\" can't name a notification"};
-  }
-  if (const Status made = make(); made.failed()) {
-    return errorOf(path_, *made);
-  }
+  if (!isPlainName(name)) return Error{EINVAL, "\"" + std::string(name) + "\" can't name a notification"};
+  if (const Status made = make(); made.failed()) return errorOf(path_, *made);
   const std::string path = path_ + "/" + std::string(name);
   struct stat facts {};
   const bool existed = ::stat(path.c_str(), &facts) == 0;
   const UniqueDescriptor file(
       ::open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NONBLOCK | O_NOCTTY | O_NOFOLLOW, kFileMode));
-  if (!file) {
-    return errorOf(path, errno);
-  }
+  if (!file) return errorOf(path, errno);
   if (!existed) {
     giveToFolderOwner(file.get(), path_);
   }

@@ -102,9 +102,7 @@ ServiceCommand parseServiceCommand(int argumentCount, const char* const* argumen
   ServiceOptions options;
   const std::optional<std::string> stateDirectory =
       raw.stateDirectory.empty() ? defaultStateDirectory(environment) : std::optional(raw.stateDirectory);
-  if (!stateDirectory) {
-    return refuse("--state-dir: must be given, neither XDG_STATE_HOME nor HOME names a folder");
-  }
+  if (!stateDirectory) return refuse("--state-dir: must be given, neither XDG_STATE_HOME nor HOME names a folder");
   options.socketPath = raw.socketPath.empty() ? defaultSocketPath(environment) : std::optional(raw.socketPath);
   options.socketIsDefault = raw.socketPath.empty();
   options.stateDirectory = *stateDirectory;

@@ -26,9 +26,7 @@ Status prepareStateDirectory(const std::string& path) {
 
 Status holdStateDirectory(const std::string& path, FileLock& lock, std::chrono::milliseconds patience) {
   const Status taken = lock.take(path + "/.lock", patience);
-  if (taken.code() == ETIMEDOUT) {
-    return Error{ETIMEDOUT, "another service uses the state directory " + path};
-  }
+  if (taken.code() == ETIMEDOUT) return Error{ETIMEDOUT, "another service uses the state directory " + path};
   return taken.ok() ? Status() : errorOf("state directory " + path, *taken);
 }
 

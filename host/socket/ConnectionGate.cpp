@@ -5,9 +5,7 @@
 namespace tarn::linux_host {
 
 void ConnectionGate::releaseHeld() {
-  if (held_.empty() || !open()) {
-    return;
-  }
+  if (held_.empty() || !open()) return;
   // Those that are held anew come behind those that had no turn.
   const auto waiting = std::exchange(held_, {});
   std::size_t next = 0;

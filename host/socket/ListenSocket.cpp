@@ -19,9 +19,7 @@ namespace {
 bool fillAddress(const std::string& path, sockaddr_un& address) {
   address = {};
   address.sun_family = AF_UNIX;
-  if (path.empty() || path.size() >= sizeof address.sun_path) {
-    return false;
-  }
+  if (path.empty() || path.size() >= sizeof address.sun_path) return false;
   std::memcpy(address.sun_path, path.data(), path.size());
   return true;
 }
@@ -47,9 +45,7 @@ Result<UniqueDescriptor> takeLock(const std::string& path) {
   const std::string lockPath = lockPathOf(path);
   for (;;) {
     UniqueDescriptor lock(::open(lockPath.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW, 0600));
-    if (!lock) {
-      return {{}, errorOf("can't open " + lockPath, errno)};
-    }
+    if (!lock) return {{}, errorOf("can't open " + lockPath, errno)};
     if (::flock(lock.get(), LOCK_EX | LOCK_NB) != 0) {
       return {{}, errno == EWOULDBLOCK ? isTaken(path) : errorOf("can't lock " + lockPath, errno)};
     }
@@ -66,25 +62,15 @@ Result<UniqueDescriptor> takeLock(const std::string& path) {
 // Makes room at the path: removes a socket file that nobody listens on. An error is what stands in the way.
 Status clearStale(const std::string& path, const sockaddr_un& address) {
   struct stat file {};
-  if (::lstat(path.c_str(), &file) != 0) {
-    return errno == ENOENT ? Status() : errorOf("can't look at " + path, errno);
-  }
-  if (!S_ISSOCK(file.st_mode)) {
-    return Error{0, path + " exists and is not a socket"};
-  }
+  if (::lstat(path.c_str(), &file) != 0) return errno == ENOENT ? Status() : errorOf("can't look at " + path, errno);
+  if (!S_ISSOCK(file.st_mode)) return Error{0, path + " exists and is not a socket"};
   const UniqueDescriptor probe = makeSocket();
-  if (!probe) {
-    return errorOf("can't make a socket", errno);
-  }
+  if (!probe) return errorOf("can't make a socket", errno);
   if (::connect(probe.get(), generic(address), sizeof address) == 0 || errno == EAGAIN || errno == EPROTOTYPE) {
     return isTaken(path);
   }
-  if (errno != ECONNREFUSED) {
-    return errorOf("can't tell whether a service is listening on " + path, errno);
-  }
-  if (::unlink(path.c_str()) != 0) {
-    return errorOf("can't remove the stale socket " + path, errno);
-  }
+  if (errno != ECONNREFUSED) return errorOf("can't tell whether a service is listening on " + path, errno);
+  if (::unlink(path.c_str()) != 0) return errorOf("can't remove the stale socket " + path, errno);
   return {};
 }
 
@@ -125,9 +111,7 @@ void ListenSocket::close() noexcept {
 Result<ListenSocket> ListenSocket::takeHandedOver() {
   Result<ListenSocket> result;
   const int count = sd_listen_fds(1);
-  if (count == 0) {
-    return result;
-  }
+  if (count == 0) return result;
   if (count < 0) {
     result.error = errorOf("can't take the socket that was handed over", -count);
   } else if (count > 1) {
@@ -151,23 +135,17 @@ Result<ListenSocket> ListenSocket::claim(const std::string& path) {
                                     std::to_string(sizeof address.sun_path - 1) + " bytes is expected"}};
   }
   Result<UniqueDescriptor> lock = takeLock(path);
-  if (lock.failed()) {
-    return {{}, std::move(lock.error)};
-  }
+  if (lock.failed()) return {{}, std::move(lock.error)};
   // From here on its end gives the lock back.
   ListenSocket socket;
   socket.name_ = path;
   socket.lock_ = std::move(lock.value);
-  if (Status cleared = clearStale(path, address); cleared.failed()) {
-    return {{}, std::move(cleared)};
-  }
+  if (Status cleared = clearStale(path, address); cleared.failed()) return {{}, std::move(cleared)};
   return {std::move(socket), {}};
 }
 
 Status ListenSocket::listen(mode_t mode) {
-  if (socket_) {
-    return {};
-  }
+  if (socket_) return {};
   sockaddr_un address;
   fillAddress(name_, address);
   UniqueDescriptor made = makeSocket();

@@ -41,9 +41,7 @@ void SocketConnection::setExportedObject(std::shared_ptr<platform::TarnReporting
 }
 
 void SocketConnection::resume() {
-  if (state_ != State::Fresh) {
-    return;
-  }
+  if (state_ != State::Fresh) return;
   state_ = State::Open;
   ++host_.ledger.connectionsOpen;
   ++host_.ledger.connectionsTotal;
@@ -52,9 +50,7 @@ void SocketConnection::resume() {
 
 // Keeps the system's idea of what to wait for in step; asks it only when something changes.
 void SocketConnection::watch(std::uint32_t events) {
-  if (events == watchedEvents_) {
-    return;
-  }
+  if (events == watchedEvents_) return;
   const std::uint32_t before = std::exchange(watchedEvents_, events);
   if (events == 0) {
     host_.loop.unwatch(socket_.get());
@@ -70,9 +66,7 @@ void SocketConnection::handleEvents(std::uint32_t events) {
   if ((events & EPOLLOUT) != 0) {
     flush();
   }
-  if (state_ != State::Open || (events & (EPOLLIN | EPOLLHUP | EPOLLERR)) == 0) {
-    return;
-  }
+  if (state_ != State::Open || (events & (EPOLLIN | EPOLLHUP | EPOLLERR)) == 0) return;
   if (!heldRequest_) {
     receive();
   } else if ((events & (EPOLLHUP | EPOLLERR)) != 0) {
@@ -152,9 +146,7 @@ void SocketConnection::serveRequest(wire::DecodedRequest& request) {
 }
 
 void SocketConnection::serveHeldRequest() {
-  if (state_ != State::Open || !heldRequest_) {
-    return;
-  }
+  if (state_ != State::Open || !heldRequest_) return;
   wire::DecodedRequest request = std::move(*heldRequest_);
   heldRequest_.reset();
   serveRequest(request);
@@ -165,9 +157,7 @@ void SocketConnection::serveHeldRequest() {
 }
 
 bool SocketConnection::takesReplies() noexcept {
-  if ((state_ == State::Open || state_ == State::Ending) && !outputBroken_) {
-    return true;
-  }
+  if ((state_ == State::Open || state_ == State::Ending) && !outputBroken_) return true;
   ++host_.ledger.repliesDropped;
   return false;
 }
@@ -206,9 +196,7 @@ void SocketConnection::replyAppended() {
 
 void SocketConnection::flush() {
   flushAsked_ = false;
-  if (!socket_ || !sendSome()) {
-    return;
-  }
+  if (!socket_ || !sendSome()) return;
   if (unsentBytes() == 0) {
     host_.ledger.repliesSent += std::exchange(unsentReplies_, 0);
     dropOutput();

@@ -37,9 +37,7 @@ void SocketListener::close() {
 }
 
 void SocketListener::startAccepting() {
-  if (accepting_ || !socket_) {
-    return;
-  }
+  if (accepting_ || !socket_) return;
   accepting_ = host_.loop.watch(socket_.descriptor(), EPOLLIN, shared_from_this()).ok();
   if (!accepting_) {
     pauseAccepting("can't wait for clients" + errorSuffix(errno));
@@ -84,9 +82,7 @@ void SocketListener::take(UniqueDescriptor client) {
     hostLog(host_.log, kHostCategory, platform::LogLevel::Default, kModule, "accepting clients again");
   }
   const auto delegate = delegate_.lock();
-  if (delegate == nullptr) {
-    return;
-  }
+  if (delegate == nullptr) return;
   delegate->listenerShouldAcceptNewConnection(
       std::make_shared<SocketConnection>(host_, std::move(client), nextNumber_++));
 }

@@ -34,20 +34,30 @@ void FileReplacement::begin(UniqueDescriptor file, std::string beside) noexcept 
 }
 
 void FileReplacement::write(std::string_view bytes) {
-  if (failure_.ok()) failure_ = writeAll(file_.get(), bytes);
+  if (failure_.ok()) {
+    failure_ = writeAll(file_.get(), bytes);
+  }
 }
 
 Status FileReplacement::takePlace(const std::string& path) {
-  if (failure_.ok() && ::fsync(file_.get()) != 0) failure_ = lastSystemError();
+  if (failure_.ok() && ::fsync(file_.get()) != 0) {
+    failure_ = lastSystemError();
+  }
   file_.reset();
-  if (failure_.ok() && std::rename(beside_.c_str(), path.c_str()) != 0) failure_ = lastSystemError();
-  if (failure_.ok()) beside_.clear();
+  if (failure_.ok() && std::rename(beside_.c_str(), path.c_str()) != 0) {
+    failure_ = lastSystemError();
+  }
+  if (failure_.ok()) {
+    beside_.clear();
+  }
   discard();
   return failure_;
 }
 
 void FileReplacement::discard() noexcept {
-  if (!beside_.empty()) ::unlink(beside_.c_str());
+  if (!beside_.empty()) {
+    ::unlink(beside_.c_str());
+  }
   beside_.clear();
 }
 

@@ -27,12 +27,12 @@ Result<FolderNames> folderNames(const std::string& folder, std::size_t limit,
     errno = 0;
     const dirent* const entry = ::readdir(directory.get());  // NOLINT(concurrency-mt-unsafe): a stream of our own
     if (entry == nullptr) {
-      if (errno != 0) found.error = lastSystemError();
+      if (errno != 0) {
+        found.error = lastSystemError();
+      }
       return found;
     }
-    if (!isWanted(entry->d_name)) {
-      continue;
-    }
+    if (!isWanted(entry->d_name)) continue;
     names.insert(entry->d_name);
     if (names.size() > limit) {
       names.erase(std::prev(names.end()));

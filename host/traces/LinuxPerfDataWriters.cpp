@@ -72,7 +72,9 @@ class Writer final : public platform::PerfDataWriter {
   }
   void stringMember(Extension extension, std::string_view name, std::string_view text) override {
     if (extension != open_ || open_ == 0) return;
-    if (std::exchange(hasMembers_, true)) extensions_ += ", ";
+    if (std::exchange(hasMembers_, true)) {
+      extensions_ += ", ";
+    }
     appendText(extensions_, name);
     extensions_ += ": ";
     appendText(extensions_, text);
@@ -115,16 +117,12 @@ Result<std::unique_ptr<platform::PerfDataWriter>> LinuxPerfDataWriters::open(std
                                                                              std::string_view name,
                                                                              std::int32_t resultsVersion,
                                                                              std::uint32_t flags) {
-  if (flags != 0) {
-    return {nullptr, systemError(EINVAL)};
-  }
+  if (flags != 0) return {nullptr, systemError(EINVAL)};
   std::string place(path);
   std::string beside = place + "." + std::to_string(::getpid()) + "." + std::to_string(++opened_);
   ::unlink(beside.c_str());  // what an earlier process of this number left
   UniqueDescriptor file(::open(beside.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, kFilePermissions));
-  if (!file) {
-    return {nullptr, lastSystemError()};
-  }
+  if (!file) return {nullptr, lastSystemError()};
   return {std::make_unique<Writer>(std::move(file), std::move(beside), std::move(place), name, resultsVersion), {}};
 }
 

@@ -39,10 +39,14 @@ class LinuxPerformanceTraceService::Session final : public platform::Performance
     recording_->setDelegate(std::move(delegate));
   }
   void startTrace() override {
-    if (recording_->askForStart()) thread_->post(TraceThread::Verb::Start, recording_);
+    if (recording_->askForStart()) {
+      thread_->post(TraceThread::Verb::Start, recording_);
+    }
   }
   void stopTrace() override {
-    if (recording_->askForStop()) thread_->post(TraceThread::Verb::Stop, recording_);
+    if (recording_->askForStop()) {
+      thread_->post(TraceThread::Verb::Stop, recording_);
+    }
   }
   bool isValid() const override { return recording_->isValid(); }
   std::uint64_t eventsLeftOut() const override { return recording_->eventsLeftOut(); }
@@ -63,7 +67,9 @@ LinuxPerformanceTraceService::~LinuxPerformanceTraceService() {
 std::shared_ptr<platform::PerformanceTraceSession> LinuxPerformanceTraceService::createSession(
     const platform::PerformanceTraceConfiguration& configuration) {
   Status ready = checked(configuration);
-  if (ready.ok() && !thread_->run()) ready = Error{0, "performance traces have no thread to run on"};
+  if (ready.ok() && !thread_->run()) {
+    ready = Error{0, "performance traces have no thread to run on"};
+  }
   if (ready.failed()) {
     hostLog(parts_.log, kTraceCategory, platform::LogLevel::Error, kModule, ready->text);
     return nullptr;

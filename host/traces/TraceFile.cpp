@@ -65,8 +65,9 @@ std::string_view nameOf(SignpostCategory category) noexcept {
 
 std::string threadName(std::int32_t thread) {
   auto [name, error] = readSmallFile("/proc/self/task/" + std::to_string(thread) + "/comm", 64);
-  while (name.ends_with('\n'))
+  while (name.ends_with('\n')) {
     name.pop_back();
+  }
   return error.failed() || name.empty() ? "thread " + std::to_string(thread) : name;
 }
 
@@ -214,7 +215,9 @@ bool TraceFile::endEvent(std::chrono::nanoseconds at) {
 void TraceFile::put(std::string_view text) {
   heldBack_ += text;
   bytes_ += text.size();
-  if (heldBack_.size() >= kBlockBytes) writeOut();
+  if (heldBack_.size() >= kBlockBytes) {
+    writeOut();
+  }
 }
 
 void TraceFile::writeOut() {

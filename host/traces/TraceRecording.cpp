@@ -100,8 +100,12 @@ void TraceRecording::drain() {
   for (const SignpostRecord& record : content.records) {
     file_->write(record);
   }
-  if (content.lost > 0) file_->writeLost(content.lost, parts_.clock.monotonic());
-  if (templateNumber_ == kTemplateOfProfiles) sampleLoad();
+  if (content.lost > 0) {
+    file_->writeLost(content.lost, parts_.clock.monotonic());
+  }
+  if (templateNumber_ == kTemplateOfProfiles) {
+    sampleLoad();
+  }
   spare_ = std::move(content.records);
   failure_ = file_->flush();
   if (failure_.failed()) {
@@ -147,7 +151,9 @@ bool TraceRecording::beginRecording(std::function<void()> wake) {
 
 void TraceRecording::endRecording() noexcept {
   const platform::MutexLock lock(mutex_);
-  if (buffer_ != nullptr) parts_.signposts.remove(buffer_.get());
+  if (buffer_ != nullptr) {
+    parts_.signposts.remove(buffer_.get());
+  }
 }
 
 void TraceRecording::sampleLoad() {
@@ -171,9 +177,13 @@ void TraceRecording::tell(const Call& call) {
   std::shared_ptr<platform::PerformanceTraceDelegate> delegate;
   {
     const platform::MutexLock lock(mutex_);
-    if (!released_) delegate = delegate_.lock();
+    if (!released_) {
+      delegate = delegate_.lock();
+    }
   }
-  if (delegate != nullptr) call(*delegate);
+  if (delegate != nullptr) {
+    call(*delegate);
+  }
 }
 
 }  // namespace tarn::linux_host

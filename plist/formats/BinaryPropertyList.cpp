@@ -296,7 +296,9 @@ class BinaryReader {
     return countValues(known.values) && spend(known.content) && addContainer(known);
   }
   bool addContainer(const Finished& made) {
-    if (!levels_.empty()) levels_.back().height = std::max(levels_.back().height, made.height + 1);
+    if (!levels_.empty()) {
+      levels_.back().height = std::max(levels_.back().height, made.height + 1);
+    }
     return add(made.value);
   }
 

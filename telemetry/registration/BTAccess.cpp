@@ -24,9 +24,7 @@ BTAccess::BTAccess(platform::AccessoryQueries* queries) : registrationInfo_(begi
 
 Result<plist::Dictionary> BTAccess::gatherData() {
   registrationInfo_->clear();
-  if (Status error = baseUnit_.enumerateBluetoothDevices(); error.failed()) {
-    return {{}, std::move(error)};
-  }
+  if (Status error = baseUnit_.enumerateBluetoothDevices(); error.failed()) return {{}, std::move(error)};
   const std::uint16_t count = baseUnit_.getDeviceCount();
   for (std::uint16_t i = 0; i < count; ++i) {
     baseUnit_.loadParams(platform::AccessoryPart::Left, i);

@@ -58,9 +58,7 @@ void TarnReportingRegistrationPublication::begin(const TarnReportingSession& ses
                                                  const std::string& hierarchyToken) {
   rtcReportingSession_ = TarnReportingFacilities().rtcReporting->createSession(sessionInfoOf(session, hierarchyToken),
                                                                                userInfoOf(session), std::nullopt);
-  if (!rtcReportingSession_) {
-    return;
-  }
+  if (!rtcReportingSession_) return;
   rtcReportingSession_->startConfiguration(
       [self = shared_from_this()](const std::optional<std::vector<std::string>>& backends) {
         self->started_ = backends.has_value();
@@ -81,9 +79,7 @@ void TarnReportingRegistrationPublication::sendRecords() {
 
 // NOLINTNEXTLINE(readability-identifier-naming): its given name
 void TarnReportingRegistrationPublication::_sendMessage(const TarnReportingSessionMessage& message) {
-  if (!rtcReportingSession_) {
-    return;
-  }
+  if (!rtcReportingSession_) return;
   const platform::RtcReportingSession::SendResult result =
       rtcReportingSession_->sendMessage(retrieveRTCReportingCategoryFromCategory(message.category()),
                                         static_cast<std::uint16_t>(message.type()), message.message());

@@ -31,9 +31,7 @@ void TarnReportingQueueSemaphore::wait(const std::shared_ptr<platform::Suspendab
 bool TarnReportingQueueSemaphore::take() {
   const MutexLock lock(mutex_);
   waiter_.reset();
-  if (count_ == 0) {
-    return false;
-  }
+  if (count_ == 0) return false;
   --count_;
   return true;
 }

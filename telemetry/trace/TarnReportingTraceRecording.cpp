@@ -27,9 +27,7 @@ bool TarnReportingTraceRecording::start() {
   const auto starting = traceSession();
   starting->setDelegate(weak_from_this());
   starting->startTrace();
-  if (TarnReportingUtilityWait(*condition_, kStartWait, answered_)) {
-    return true;
-  }
+  if (TarnReportingUtilityWait(*condition_, kStartWait, answered_)) return true;
   kLog(LogLevel::Error, "timed out waiting for performance trace to start");
   if (const auto late = traceSession(); late && late->isValid()) {
     late->stopTrace();
@@ -39,9 +37,7 @@ bool TarnReportingTraceRecording::start() {
 
 TarnReportingTraceRecording::End TarnReportingTraceRecording::stop() {
   const auto stopping = traceSession();
-  if (!stopping) {
-    return End::NoTrace;
-  }
+  if (!stopping) return End::NoTrace;
   stopping->stopTrace();
   if (!TarnReportingUtilityWait(*condition_, kStopWait, completed_)) {
     kLog(LogLevel::Error, "timed out waiting for performance trace to stop.  No pdj file wil be generated. ");

@@ -93,22 +93,16 @@ void TarnReportingTraceResults::processTraceSkein(const std::optional<std::strin
   }
   const std::optional<std::vector<plist::Dictionary>> descriptions =
       readProbeDescriptions(configuredText(session_.configuration(), kProbeDescriptionsKey));
-  if (!descriptions) {
-    return;
-  }
+  if (!descriptions) return;
   const auto library = loadLibrary();
-  if (!library) {
-    return;
-  }
+  if (!library) return;
   const auto model = library->openTrace(*tracePath);
   if (model.failed()) {
     kLog(LogLevel::Error, "failed to create Skein model: %@", model.error->text);
     return;
   }
   // Without a writer there is nowhere to write to.
-  if (!createPDWriter()) {
-    return;
-  }
+  if (!createPDWriter()) return;
   processSignposts(*model.value);
   for (const platform::TraceProbe& probe : library->probesForDictionaries(*descriptions, *model.value)) {
     processProbe(probe);
@@ -159,9 +153,7 @@ void TarnReportingTraceResults::processSignposts(platform::TraceModel& trace) {
   std::vector<Sums> sums;
   std::unordered_map<std::string_view, std::size_t> places;  // in `sums`, by names that lie in `intervals`
   for (const platform::SignpostInterval& interval : intervals.value) {
-    if (!isOurs(interval)) {
-      continue;
-    }
+    if (!isOurs(interval)) continue;
     const double milliseconds = millisecondsOf(interval);
     kLog(LogLevel::Debug, "name:%@ time:%f ms", interval.name, milliseconds);
     writeValue(interval.name, milliseconds);
@@ -183,9 +175,7 @@ void TarnReportingTraceResults::processProbe(const platform::TraceProbe& probe) 
   for (const platform::TraceProbe& child : probe.children) {
     processProbe(child);
   }
-  if (!probe.measuresSignpostIntervals) {
-    return;
-  }
+  if (!probe.measuresSignpostIntervals) return;
   for (const platform::SignpostInterval& event : probe.events) {
     if (currentProbe_ && *currentProbe_ != probe.name) {
       writeSums(*currentProbe_, totalTimeValue_, totalTimeMetrics_);

@@ -19,7 +19,9 @@ class FakeAccessoryQueries final : public platform::AccessoryQueries {
   // The interface.
   Result<std::uint16_t> enumerate() override {
     ++enumerations_;
-    if (onEnumerate_) onEnumerate_();
+    if (onEnumerate_) {
+      onEnumerate_();
+    }
     if (error_.failed()) return {0, error_};
     found_ = accessories_;
     return {static_cast<std::uint16_t>(found_.size()), {}};

@@ -76,8 +76,12 @@ FakeFlumeService::Subscribed FakeFlumeService::subscribe(const FlumeChannelSet& 
   if (fails(Step::Subscribe, subscribed.error)) return subscribed;
   FlumeChannelSet covered = channels;
   std::erase_if(covered, [this](const FlumeChannelName& name) { return holds(refused_, name); });
-  if (!withholdsHandle_) subscribed.subscription = std::make_shared<Subscription>(covered);
-  if (!withholdsChannels_) subscribed.channels = std::make_shared<const FlumeChannelSet>(std::move(covered));
+  if (!withholdsHandle_) {
+    subscribed.subscription = std::make_shared<Subscription>(covered);
+  }
+  if (!withholdsChannels_) {
+    subscribed.channels = std::make_shared<const FlumeChannelSet>(std::move(covered));
+  }
   return subscribed;
 }
 
@@ -89,7 +93,9 @@ platform::FlumeService::SamplesResult FakeFlumeService::createSamples(platform::
   FlumeSamples samples;
   for (const auto& name : subscribedChannels) {
     const auto* channel = find(channels_, name);
-    if (channel != nullptr && holds(covered, name)) samples.push_back(*channel);
+    if (channel != nullptr && holds(covered, name)) {
+      samples.push_back(*channel);
+    }
   }
   result.value = std::make_shared<const FlumeSamples>(std::move(samples));
   return result;
@@ -105,7 +111,9 @@ platform::FlumeService::SamplesResult FakeFlumeService::createDelta(const std::s
   }
   FlumeSamples delta = *later;
   for (auto& channel : delta) {
-    if (const auto* before = find(*earlier, channel.name)) subtract(channel, *before);
+    if (const auto* before = find(*earlier, channel.name)) {
+      subtract(channel, *before);
+    }
   }
   result.value = std::make_shared<const FlumeSamples>(std::move(delta));
   return result;
@@ -139,7 +147,9 @@ bool FakeFlumeService::fails(Step step, Status& error) {
   happened(kStepNames[static_cast<std::size_t>(step)]);
   const auto found = failures_.find(step);
   if (found == failures_.end()) return false;
-  if (found->second) error = Error{*found->second, "ordered by the test"};
+  if (found->second) {
+    error = Error{*found->second, "ordered by the test"};
+  }
   return true;
 }
 

@@ -7,7 +7,9 @@ class FakePerfDataWriters::Writer final : public platform::PerfDataWriter {
   Writer(std::shared_ptr<File> file, Status closeError) : file_(std::move(file)), closeError_(std::move(closeError)) {}
 
   void newValue(std::string_view name, platform::PerfDataUnit, double value) override {
-    if (!file_->closed) file_->values.emplace_back(name, value);
+    if (!file_->closed) {
+      file_->values.emplace_back(name, value);
+    }
   }
   Extension startExtension(std::string_view name) override {
     file_->extensions.push_back({std::string(name), {}, false, file_->values.size()});
@@ -15,7 +17,9 @@ class FakePerfDataWriters::Writer final : public platform::PerfDataWriter {
   }
   void stringMember(Extension extension, std::string_view name, std::string_view text) override {
     auto& into = file_->extensions.at(extension - 1);
-    if (!into.ended && !file_->closed) into.members.emplace_back(name, text);
+    if (!into.ended && !file_->closed) {
+      into.members.emplace_back(name, text);
+    }
   }
   void endExtension(Extension extension) override { file_->extensions.at(extension - 1).ended = true; }
   Status close() override {

@@ -45,7 +45,9 @@ class FakePerformanceTraceService::Session final : public platform::PerformanceT
     }
     // A session that was let go of makes no more callbacks.
     ledger_->callbacks.deliver([weak = weak_from_this(), error] {
-      if (const auto self = weak.lock()) self->tell([&](auto& delegate) { delegate.performanceTraceDidStart(error); });
+      if (const auto self = weak.lock()) {
+        self->tell([&](auto& delegate) { delegate.performanceTraceDidStart(error); });
+      }
     });
   }
 
@@ -60,7 +62,9 @@ class FakePerformanceTraceService::Session final : public platform::PerformanceT
       valid_ = false;
     }
     ledger_->callbacks.deliver([weak = weak_from_this(), stopError, completionError] {
-      if (const auto self = weak.lock()) self->tellStopped(stopError, completionError);
+      if (const auto self = weak.lock()) {
+        self->tellStopped(stopError, completionError);
+      }
     });
   }
 
@@ -82,7 +86,9 @@ class FakePerformanceTraceService::Session final : public platform::PerformanceT
       const std::lock_guard lock(ledger_->mutex);
       delegate = delegate_.lock();
     }
-    if (delegate != nullptr) call(*delegate);
+    if (delegate != nullptr) {
+      call(*delegate);
+    }
   }
 
   void tellStopped(const Status& stopError, const Status& completionError) {

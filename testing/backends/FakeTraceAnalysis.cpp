@@ -50,7 +50,9 @@ FakeTraceAnalysis::~FakeTraceAnalysis() = default;
 
 platform::TraceAnalysis::Loaded FakeTraceAnalysis::load() {
   ++loads_;
-  if (onLoad_) onLoad_();
+  if (onLoad_) {
+    onLoad_();
+  }
   if (!missingClass_.empty()) return {nullptr, missingClass_};
   return {std::make_shared<Library>(content_), {}};
 }

@@ -77,8 +77,9 @@ TEST(ClientConnection, ALostConnectionFailsEverythingOutstandingThenTellsTheOwne
   pair.client->send(getAllReporters(), outcomes.handler("all"));
   pair.client->send(reporterID(5), outcomes.handler("valid"));
   pair.server->hangUp();
-  while (pair.client->connected())
+  while (pair.client->connected()) {
     pair.client->wait(std::chrono::seconds(5));
+  }
   EXPECT_EQ(outcomes.heard(), (Strings{"start connection lost", "all connection lost", "valid connection lost"}));
   EXPECT_EQ(lost, Strings{"the service ended the connection"});
   EXPECT_EQ(pair.client->outstanding(), 0U);
@@ -96,8 +97,9 @@ TEST(ClientConnection, RepliesThatCameBeforeTheEndAreStillDelivered) {
   pair.server->reply(first->id);
   pair.server->hangUp();
   pair.client->trySend(getAllReporters(), outcomes.handler("third"));
-  while (pair.client->connected())
+  while (pair.client->connected()) {
     pair.client->dispatch();
+  }
   EXPECT_EQ(outcomes.heard(), (Strings{"first ok", "second connection lost", "third connection lost"}));
 }
 

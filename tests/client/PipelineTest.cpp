@@ -121,13 +121,15 @@ TEST(ClientConnection, TrySendSaysFullInsteadOfWaiting) {
   Pair pair(options);
   const Request large = setConfiguration({{"k", std::string(10000, 'x')}}, 1);
   std::size_t sent = 0;
-  while (pair.client->trySend(large) == SendStatus::Sent)
+  while (pair.client->trySend(large) == SendStatus::Sent) {
     ++sent;
+  }
   EXPECT_GE(sent, 10U);
   EXPECT_EQ(pair.client->outstanding(), sent);
   const Served serving([&] { pair.server->acknowledge(sent); });
-  while (pair.client->outstanding() > 0)
+  while (pair.client->outstanding() > 0) {
     pair.client->wait(std::chrono::seconds(5));
+  }
   EXPECT_EQ(pair.client->trySend(large), SendStatus::Sent);
 }
 
@@ -143,8 +145,9 @@ TEST(ClientConnection, SendWaitsUntilTheServiceHasTakenEnough) {
     ASSERT_EQ(pair.client->send(large, [&](Reply&& reply) { acknowledged += reply.ok() ? 1U : 0U; }), SendStatus::Sent);
   }
   pair.client->flush();
-  while (pair.client->outstanding() > 0)
+  while (pair.client->outstanding() > 0) {
     pair.client->wait(std::chrono::seconds(5));
+  }
   EXPECT_EQ(acknowledged, kCount);
 }
 
@@ -165,12 +168,15 @@ TEST(ClientConnection, AHandlerMaySendTheNextRequest) {
   Pair pair;
   int rounds = 0;
   std::function<void(Reply &&)> next = [&](Reply&&) {
-    if (++rounds < 100) pair.client->send(getAllReporters(), next);
+    if (++rounds < 100) {
+      pair.client->send(getAllReporters(), next);
+    }
   };
   pair.client->send(getAllReporters(), next);
   const Served serving([&] { pair.server->acknowledge(100); });
-  while (rounds < 100)
+  while (rounds < 100) {
     pair.client->wait(std::chrono::seconds(5));
+  }
   EXPECT_EQ(pair.client->outstanding(), 0U);
 }
 

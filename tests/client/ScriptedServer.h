@@ -77,7 +77,9 @@ class ScriptedServer {
   }
 
   void hangUp() {
-    if (fd_ >= 0) ::close(std::exchange(fd_, -1));
+    if (fd_ >= 0) {
+      ::close(std::exchange(fd_, -1));
+    }
   }
 
  private:

@@ -52,8 +52,9 @@ TEST(ClientConnection, ThreadsMayUseOneClientInTurn) {
       }
     });
   }
-  for (std::thread& thread : threads)
+  for (std::thread& thread : threads) {
     thread.join();
+  }
   EXPECT_EQ(good, kThreads * kCalls);
 }
 
@@ -68,12 +69,14 @@ TEST(ClientConnection, ManyClientsOnTheirOwnThreadsDoNotMeet) {
         pair.client->send(sendMessage({{"volume", n}}, 4, 1), [&](Reply&& reply) { good += reply.ok() ? 1U : 0U; });
       }
       pair.client->flush();
-      while (pair.client->outstanding() > 0)
+      while (pair.client->outstanding() > 0) {
         pair.client->wait(std::chrono::seconds(5));
+      }
     });
   }
-  for (std::thread& thread : threads)
+  for (std::thread& thread : threads) {
     thread.join();
+  }
   EXPECT_EQ(good, 2000U);
 }
 

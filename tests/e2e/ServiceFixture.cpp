@@ -127,9 +127,7 @@ json ServiceFixture::ledgerAtRest() {
 
 json replyTo(const std::vector<json>& replies, std::size_t line) {
   for (const json& reply : replies) {
-    if (reply.at("line") == line) {
-      return reply;
-    }
+    if (reply.at("line") == line) return reply;
   }
   return {};
 }

@@ -31,7 +31,9 @@ class NotedManager final : public ServiceManager {
  public:
   void notifyReady() override { ready = true; }
   void notifyStopping() override {
-    if (onStopping) onStopping();
+    if (onStopping) {
+      onStopping();
+    }
   }
   std::optional<std::chrono::microseconds> watchdogInterval() const override { return std::nullopt; }
 

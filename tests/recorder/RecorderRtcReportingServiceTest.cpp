@@ -129,12 +129,14 @@ TEST_F(RecorderRtcReportingServiceTest, SessionMayBeUsedFromAnyThread) {
     threads.emplace_back([&] {
       const auto session = makeSession(*service);
       static_cast<void>(backendsOf(*session));
-      for (int i = 0; i < 200; ++i)
+      for (int i = 0; i < 200; ++i) {
         EXPECT_TRUE(session->sendMessage(1, 1, {{"n", i}}).sent);
+      }
     });
   }
-  for (auto& thread : threads)
+  for (auto& thread : threads) {
     thread.join();
+  }
   ASSERT_TRUE(flush());
   EXPECT_EQ(ask(file(),
                 "SELECT detail ->> 'session', count(*), max(payload ->> 'n') FROM events "

@@ -225,8 +225,9 @@ TEST_F(RecorderTest, ReadersSeeCommittedEventsWhileMoreAreWritten) {
   ASSERT_TRUE(flush());
   std::atomic<bool> done{false};
   std::thread writer([&] {
-    for (int i = 0; i < 200; ++i)
+    for (int i = 0; i < 200; ++i) {
       recordMany(20);
+    }
     done = true;
   });
   long last = 100;

@@ -27,9 +27,7 @@ class Pipe {
   void feed(std::string_view text) {
     while (!text.empty()) {
       const auto count = ::write(ends_[1], text.data(), text.size());
-      if (count <= 0) {
-        return;
-      }
+      if (count <= 0) return;
       text.remove_prefix(static_cast<std::size_t>(count));
     }
   }
@@ -94,9 +92,7 @@ TEST(ScriptLines, RefusesALineThatIsTooLongBeforeItHasAllCome) {
   ScriptLines::Next next = ScriptLines::Next::Incomplete;
   while (next == ScriptLines::Next::Incomplete || next == ScriptLines::Next::Line) {
     next = lines.next(line);
-    if (next == ScriptLines::Next::Incomplete && lines.fill().failed()) {
-      break;
-    }
+    if (next == ScriptLines::Next::Incomplete && lines.fill().failed()) break;
   }
   feeder.join();
   EXPECT_EQ(next, ScriptLines::Next::TooLong);

@@ -159,11 +159,13 @@ TEST(ReplyDecoder, WhatWasNotDecodedHasNoNumberAndNoCode) {
 
 TEST(ReplyDecoder, ResultsNestAsDeepAsArgumentsAndNoDeeper) {
   std::string maps;
-  for (std::size_t i = 0; i + 1 < kMaxNesting; ++i)
+  for (std::size_t i = 0; i + 1 < kMaxNesting; ++i) {
     maps += "a1616b";
+  }
   std::string arrays;
-  for (std::size_t i = 0; i + 1 < kMaxNesting; ++i)
+  for (std::size_t i = 0; i + 1 < kMaxNesting; ++i) {
     arrays += "81";
+  }
   EXPECT_TRUE(decode("8307f6" + arrays + "80").good);
   EXPECT_FALSE(decode("8307f6" + arrays + "8180").good);
   EXPECT_TRUE(decode("8307f6" + maps + "a0").good);

@@ -94,8 +94,9 @@ json toPeer(const plist::ValueView& value) {
       return json::binary({value.data().begin(), value.data().end()});
     case plist::Kind::Array: {
       json made = json::array();
-      for (const plist::ValueView item : value.array())
+      for (const plist::ValueView item : value.array()) {
         made.push_back(toPeer(item));
+      }
       return made;
     }
     case plist::Kind::Dictionary: {

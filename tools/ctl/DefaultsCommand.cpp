@@ -51,18 +51,14 @@ int print(const plist::ValueView& value, JsonLayout layout) {
 }
 
 int read(const Context& context, const Arguments& arguments) {
-  if (!isNamed(context.stateDirectory, "--state-dir")) {
-    return kWrongUsage;
-  }
+  if (!isNamed(context.stateDirectory, "--state-dir")) return kWrongUsage;
   Defaults defaults(context);
   const JsonDefaultsStore::Suite suite = defaults->suite(arguments.suite);
   if (suite.failed()) {
     complain(printable(suite.error->text));
     return kBadInput;
   }
-  if (arguments.wholeSuite) {
-    return print(suite.value, JsonLayout::Indented);
-  }
+  if (arguments.wholeSuite) return print(suite.value, JsonLayout::Indented);
   const plist::ValueView value = suite.value.get(arguments.key);
   if (!value.present()) {
     complain("there is no key \"" + printable(arguments.key) + "\" in " + printable(arguments.suite));
@@ -73,15 +69,11 @@ int read(const Context& context, const Arguments& arguments) {
 
 // An absent value removes the key.
 int store(const Context& context, const Arguments& arguments, const plist::ValueView& value) {
-  if (!isNamed(context.stateDirectory, "--state-dir")) {
-    return kWrongUsage;
-  }
+  if (!isNamed(context.stateDirectory, "--state-dir")) return kWrongUsage;
   Defaults defaults(context);
   const bool isBroken = defaults->suite(arguments.suite).failed();
   const Status stored = defaults->store(arguments.suite, arguments.key, value);
-  if (stored.ok()) {
-    return kSuccess;
-  }
+  if (stored.ok()) return kSuccess;
   complain(printable(stored->text));
   return isBroken ? kBadInput : kFailure;
 }

@@ -32,14 +32,10 @@ std::string checkStateWord(const std::string& text) {
 }
 
 int notify(const Context& context, const Arguments& arguments) {
-  if (!isNamed(context.stateDirectory, "--state-dir")) {
-    return kWrongUsage;
-  }
+  if (!isNamed(context.stateDirectory, "--state-dir")) return kWrongUsage;
   const linux_host::NotificationFolder notifications(context.stateDirectory + "/notifications");
   const Status posted = notifications.post(arguments.name, stateWord(arguments.state));
-  if (posted.ok()) {
-    return kSuccess;
-  }
+  if (posted.ok()) return kSuccess;
   complain(printable(posted->text));
   return kFailure;
 }

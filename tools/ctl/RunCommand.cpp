@@ -91,9 +91,7 @@ class InputFile {
 };
 
 int run(const Context& context, const std::string& path) {
-  if (!isNamed(context.socket, "--socket")) {
-    return kWrongUsage;
-  }
+  if (!isNamed(context.socket, "--socket")) return kWrongUsage;
   const InputFile file(path);
   if (file.fd() < 0) {
     complain(linux_host::errorOf("can't open the script " + printable(path), errno).text);

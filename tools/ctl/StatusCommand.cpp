@@ -42,9 +42,7 @@ void printStatus(Output& output, const std::string& socket, const plist::Diction
 
 int status(const Context& context, bool asJson) {
   const Answer answer = askService(context.socket, client::status());
-  if (answer.status != 0) {
-    return answer.status;
-  }
+  if (answer.status != 0) return answer.status;
   Output output(STDOUT_FILENO);
   const plist::Dictionary dictionary = answer.reply.dictionary();
   if (asJson) {

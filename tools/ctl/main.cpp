@@ -74,9 +74,7 @@ int mainProgram(int argc, const char* const* argv) {
   context.stateDirectory = linux_host::defaultStateDirectory(environment).value_or("");
   CLI::App app;
   describe(app, context);
-  if (const auto status = parse(app, argc, argv)) {
-    return *status;
-  }
+  if (const auto status = parse(app, argc, argv)) return *status;
   return context.chosen();
 }
 

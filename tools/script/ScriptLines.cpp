@@ -25,9 +25,7 @@ ScriptLines::Next ScriptLines::next(std::string_view& line) {
     scanned_ = buffer_.size();
     return Next::Incomplete;
   }
-  if (!isWhole && length == 0) {
-    return Next::End;
-  }
+  if (!isWhole && length == 0) return Next::End;
   line = std::string_view(buffer_).substr(begin_, length);
   begin_ += length + (isWhole ? 1 : 0);
   scanned_ = begin_;
@@ -46,9 +44,7 @@ Status ScriptLines::fill() {
     count = ::read(fd_, buffer_.data() + held, kReadBytes);
   } while (count < 0 && errno == EINTR);
   buffer_.resize(held + static_cast<std::size_t>(std::max<ssize_t>(count, 0)));
-  if (count < 0) {
-    return linux_host::lastSystemError();
-  }
+  if (count < 0) return linux_host::lastSystemError();
   ended_ = count == 0;
   return {};
 }

@@ -64,9 +64,7 @@ bool isInteger(const ValueView& value) {
 }
 
 std::optional<std::int64_t> reporterIDFrom(const ValueView& value) {
-  if (value.kind() == Kind::Signed) {
-    return value.signedValue();
-  }
+  if (value.kind() == Kind::Signed) return value.signedValue();
   constexpr auto kMax = static_cast<std::uint64_t>(std::numeric_limits<std::int64_t>::max());
   if (value.kind() == Kind::Unsigned && value.unsignedValue() <= kMax) {
     return static_cast<std::int64_t>(value.unsignedValue());
@@ -113,12 +111,8 @@ class LineReader {
 
 bool LineReader::readOp() {
   const ValueView op = members_.get("op");
-  if (!op.present()) {
-    return fail("there is no member \"op\"", "the name of an operation");
-  }
-  if (!op.isText()) {
-    return failMember("op", op, "the name of an operation");
-  }
+  if (!op.present()) return fail("there is no member \"op\"", "the name of an operation");
+  if (!op.isText()) return failMember("op", op, "the name of an operation");
   step_.op = op.text();
   if (step_.op == "sleep") {
     step_.kind = ScriptStep::Kind::Sleep;
@@ -143,9 +137,7 @@ bool LineReader::readClient() {
     step_.client = kDefaultClient;
     return true;
   }
-  if (!client.isText() || client.text().empty()) {
-    return failMember("client", client, "a text that names a connection");
-  }
+  if (!client.isText() || client.text().empty()) return failMember("client", client, "a text that names a connection");
   step_.client = client.text();
   return true;
 }
@@ -162,12 +154,18 @@ bool LineReader::checkMembers() {
   std::optional<std::string_view> missing;
   const auto note = [&](std::string_view name, bool isNeeded) {
     taken += ", " + quoted(name);
-    if (isNeeded && !missing && !members_.contains(name)) missing = name;
+    if (isNeeded && !missing && !members_.contains(name)) {
+      missing = name;
+    }
   };
   for (const ArgumentRow& row : wire::kArguments) {
-    if (takes(row)) note(row.name, !mayBeLeftOut(row));
+    if (takes(row)) {
+      note(row.name, !mayBeLeftOut(row));
+    }
   }
-  if (takesSeconds()) note(kSeconds, true);
+  if (takesSeconds()) {
+    note(kSeconds, true);
+  }
   for (const auto& entry : members_) {
     if (!takesMember(entry.key.text())) {
       return fail(step_.op + " has no member " + quoted(entry.key.text()), "only " + taken);
@@ -188,27 +186,19 @@ bool LineReader::readArguments() {
 bool LineReader::read(const ArgumentRow& row, std::int64_t& number) {
   const ValueView value = members_.get(row.name);
   const auto found = reporterIDFrom(value);
-  if (!found) {
-    return failMember(row.name, value, "an integer from -2^63 to 2^63-1");
-  }
+  if (!found) return failMember(row.name, value, "an integer from -2^63 to 2^63-1");
   number = *found;
   return true;
 }
 
 bool LineReader::read(const ArgumentRow& row, wire::ReporterIDs& numbers) {
   const ValueView value = members_.get(row.name);
-  if (!value.present()) {
-    return true;
-  }
-  if (value.kind() != Kind::Array) {
-    return failMember(row.name, value, "an array of integers");
-  }
+  if (!value.present()) return true;
+  if (value.kind() != Kind::Array) return failMember(row.name, value, "an array of integers");
   numbers.emplace();
   for (const ValueView item : value.array()) {
     const auto number = reporterIDFrom(item);
-    if (!number) {
-      return failMember(row.name, value, "an array of integers from -2^63 to 2^63-1");
-    }
+    if (!number) return failMember(row.name, value, "an array of integers from -2^63 to 2^63-1");
     numbers->push_back(*number);
   }
   return true;
@@ -226,9 +216,7 @@ bool LineReader::readSeconds() {
 
 bool LineReader::read(const ArgumentRow& row, plist::Dictionary& dictionary) {
   const ValueView value = members_.get(row.name);
-  if (value.kind() != Kind::Dictionary) {
-    return failMember(row.name, value, "an object");
-  }
+  if (value.kind() != Kind::Dictionary) return failMember(row.name, value, "an object");
   dictionary = value.dictionary();
   return true;
 }
@@ -269,9 +257,7 @@ Result<ScriptStep> parseLine(std::string_view text, std::size_t line) {
   step.line = line;
   const plist::Dictionary members = object.dictionary();
   LineReader reader(members, step);
-  if (!reader.read()) {
-    return {{}, reader.fault()};
-  }
+  if (!reader.read()) return {{}, reader.fault()};
   return {std::move(step), {}};
 }
 

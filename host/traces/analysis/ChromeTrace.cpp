@@ -105,7 +105,9 @@ class Listener final : public JsonListener {
     return isWithinDepth();
   }
   bool endArray() override {
-    if (depth_-- == eventsDepth_) inEvents_ = false;
+    if (depth_-- == eventsDepth_) {
+      inEvents_ = false;
+    }
     return true;
   }
   bool text(std::string_view text) override {
@@ -123,9 +125,15 @@ class Listener final : public JsonListener {
   }
   bool number(const Number& number) override {
     if (!isOfEvent()) return true;
-    if (member_ == Member::Process && number.isWhole) event_.process = number.whole;
-    if (member_ == Member::Thread && number.isWhole) event_.thread = number.whole;
-    if (member_ == Member::Time || member_ == Member::Duration) takeTime(number.value);
+    if (member_ == Member::Process && number.isWhole) {
+      event_.process = number.whole;
+    }
+    if (member_ == Member::Thread && number.isWhole) {
+      event_.thread = number.whole;
+    }
+    if (member_ == Member::Time || member_ == Member::Duration) {
+      takeTime(number.value);
+    }
     return true;
   }
 
@@ -150,7 +158,9 @@ class Listener final : public JsonListener {
   bool keepEvent() {
     const bool isComplete = event_.phase == 'X' && event_.hasDuration && event_.duration >= 0 && event_.hasName;
     const bool isPart = (event_.phase == 'B' && event_.hasName) || event_.phase == 'E';
-    if (!hasSubsystem_) event_.subsystem = texts_.number({});
+    if (!hasSubsystem_) {
+      event_.subsystem = texts_.number({});
+    }
     if (!event_.hasTime || !(isComplete || isPart)) return true;
     if (events_.size() >= limits_.mostEvents) {
       failure_ = Error{0, "it has more than " + std::to_string(limits_.mostEvents) + " events"};
@@ -232,7 +242,9 @@ Result<ChromeTrace> systemFailure(int number) {
 struct Descriptor {
   explicit Descriptor(int opened) : number(opened) {}
   ~Descriptor() {
-    if (number >= 0) ::close(number);
+    if (number >= 0) {
+      ::close(number);
+    }
   }
   Descriptor(const Descriptor&) = delete;
   Descriptor& operator=(const Descriptor&) = delete;
@@ -248,7 +260,9 @@ Result<ChromeTrace> parseTrace(std::string_view bytes, const TraceLimits& limits
   Listener listener(limits);
   if (const auto position = scanJson(bytes, listener)) {
     read.error = listener.failure();
-    if (read.ok()) read.error = Error{0, "it is no whole JSON text: at byte " + std::to_string(*position)};
+    if (read.ok()) {
+      read.error = Error{0, "it is no whole JSON text: at byte " + std::to_string(*position)};
+    }
   } else if (!listener.foundEvents()) {
     read.error = Error{0, "it has no array of trace events"};
   } else {

@@ -32,8 +32,9 @@ class Model final : public platform::TraceModel {
     try {
       std::vector<SignpostInterval> intervals;
       intervals.reserve(trace_.intervals.size());
-      for (std::size_t i = 0; i < trace_.intervals.size(); ++i)
+      for (std::size_t i = 0; i < trace_.intervals.size(); ++i) {
         intervals.push_back(intervalAt(trace_, i));
+      }
       return {std::move(intervals), {}};
     } catch (const std::exception& error) {
       return {{}, Error{0, error.what()}};
@@ -53,8 +54,9 @@ std::vector<TraceProbe> madeOf(const std::vector<Probe>& probes, const ChromeTra
     TraceProbe& one = made.emplace_back();
     one = {probe.name, kind, probe.measuresIntervals, {}, madeOf(probe.children, trace)};
     one.events.reserve(probe.events.size());
-    for (const std::uint32_t event : probe.events)
+    for (const std::uint32_t event : probe.events) {
       one.events.push_back(intervalAt(trace, event));
+    }
   }
   return made;
 }

@@ -25,7 +25,9 @@ class Reader {
     }
     for (const Json& description : descriptions) {
       if (failure_.failed()) break;
-      if (auto probe = probeOf(description, depth)) probes.push_back(std::move(*probe));
+      if (auto probe = probeOf(description, depth)) {
+        probes.push_back(std::move(*probe));
+      }
     }
     return probes;
   }
@@ -55,8 +57,12 @@ class Reader {
       return std::nullopt;
     }
     Probe probe{*name, *kind == "SkeinSignpostIntervalProbe", {}, {}};
-    if (probe.measuresIntervals) probe.events = eventsOf(*subsystem, *signpost);
-    if (children != description.end()) probe.children = probesOf(*children, depth + 1);
+    if (probe.measuresIntervals) {
+      probe.events = eventsOf(*subsystem, *signpost);
+    }
+    if (children != description.end()) {
+      probe.children = probesOf(*children, depth + 1);
+    }
     return probe;
   }
 
@@ -102,7 +108,9 @@ Result<std::vector<Probe>> probesFor(std::string_view descriptions, const Chrome
   if (!parsed.is_array()) return {{}, Error{0, "the descriptions are no JSON array"}};
   Reader reader(trace, limits);
   Result<std::vector<Probe>> read{reader.probesOf(parsed, 1), reader.failure()};
-  if (read.failed()) read.value.clear();
+  if (read.failed()) {
+    read.value.clear();
+  }
   return read;
 }
 
@@ -125,8 +133,9 @@ bool matchesPattern(std::string_view pattern, std::string_view text) noexcept {
       return false;
     }
   }
-  while (at < pattern.size() && pattern[at] == '*')
+  while (at < pattern.size() && pattern[at] == '*') {
     ++at;
+  }
   return at == pattern.size();
 }
 

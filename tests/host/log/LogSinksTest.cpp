@@ -249,9 +249,7 @@ std::vector<std::vector<std::string>> sent;
 int refusal = 0;
 
 int keep(const struct iovec* fields, int count) {
-  if (refusal != 0) {
-    return -refusal;
-  }
+  if (refusal != 0) return -refusal;
   std::vector<std::string>& texts = sent.emplace_back();
   for (int index = 0; index < count; ++index) {
     texts.emplace_back(static_cast<const char*>(fields[index].iov_base), fields[index].iov_len);

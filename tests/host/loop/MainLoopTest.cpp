@@ -159,9 +159,7 @@ int signalInChild(int signal) {
       received = which;
       loop.stop();
     });
-    if (heard.failed()) {
-      return 100;
-    }
+    if (heard.failed()) return 100;
     loop.queue()->async([signal] { ::kill(::getpid(), signal); });
     loop.run();
     return received;
@@ -193,9 +191,7 @@ TEST(SignalSource, ABrokenPipeDoesNotEndTheProcess) {
   EXPECT_EQ(testing::inChild([] {
               const SignalSource source;
               int pipe[2];
-              if (::pipe(pipe) != 0 || ::close(pipe[0]) != 0) {
-                return 1;
-              }
+              if (::pipe(pipe) != 0 || ::close(pipe[0]) != 0) return 1;
               return ::write(pipe[1], "x", 1) == -1 && errno == EPIPE ? 0 : 2;
             }),
             0);

@@ -18,7 +18,9 @@ class LinuxFileSystemTest : public testing::Test {
   LinuxFileSystemTest() {
     std::string pattern = std::filesystem::temp_directory_path() / "tarn-files.XXXXXX";
     const char* made = ::mkdtemp(pattern.data());
-    if (made != nullptr) directory_ = made;
+    if (made != nullptr) {
+      directory_ = made;
+    }
   }
   ~LinuxFileSystemTest() override {
     std::error_code ignored;

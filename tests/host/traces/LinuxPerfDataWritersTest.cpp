@@ -85,8 +85,9 @@ TEST_F(LinuxPerfDataWritersTest, AFileWithoutContentIsWhole) {
 
 TEST_F(LinuxPerfDataWritersTest, ValuesThatAreNotFiniteAreTexts) {
   const auto writer = open();
-  for (const double value : {std::nan(""), HUGE_VAL, -HUGE_VAL})
+  for (const double value : {std::nan(""), HUGE_VAL, -HUGE_VAL}) {
     writer->newValue("v", PerfDataUnit::Milliseconds, value);
+  }
   ASSERT_TRUE(writer->close().ok());
   const json values = json::parse(contentOf(path())).at("values");
   EXPECT_EQ(values.at(0).at("value"), "nan");
@@ -119,20 +120,23 @@ TEST_F(LinuxPerfDataWritersTest, AnExtensionThatIsNotOpenTakesNothing) {
 TEST_F(LinuxPerfDataWritersTest, ManyValuesArriveInOrder) {
   constexpr int kCount = 20000;
   const auto writer = open();
-  for (int value = 0; value < kCount; ++value)
+  for (int value = 0; value < kCount; ++value) {
     writer->newValue("v", PerfDataUnit::Milliseconds, value);
+  }
   ASSERT_TRUE(writer->close().ok());
   const json values = json::parse(contentOf(path())).at("values");
   ASSERT_EQ(values.size(), std::size_t{kCount});
-  for (int value = 0; value < kCount; ++value)
+  for (int value = 0; value < kCount; ++value) {
     ASSERT_EQ(values[static_cast<std::size_t>(value)].at("value"), value);
+  }
 }
 
 TEST_F(LinuxPerfDataWritersTest, WhatIsThereStaysUntilTheFileIsWhole) {
   std::ofstream(path()) << "before";
   const auto writer = open();
-  for (int value = 0; value < 5000; ++value)
+  for (int value = 0; value < 5000; ++value) {
     writer->newValue("v", PerfDataUnit::Milliseconds, value);
+  }
   EXPECT_EQ(contentOf(path()), "before");
   ASSERT_TRUE(writer->close().ok());
   EXPECT_TRUE(json::accept(contentOf(path())));
@@ -198,8 +202,9 @@ int closeWithRoomFor(LinuxPerfDataWriters& writers, const std::string& path, rli
     if (::setrlimit(RLIMIT_FSIZE, &limit) != 0) return 255;
     auto opened = writers.open(path, "n", 4, 0);
     if (opened.failed()) return 254;
-    for (int value = 0; value < values; ++value)
+    for (int value = 0; value < values; ++value) {
       opened.value->newValue("v", PerfDataUnit::Milliseconds, value);
+    }
     return static_cast<int>(opened.value->close().code());
   });
 }

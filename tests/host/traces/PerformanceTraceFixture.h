@@ -71,7 +71,9 @@ class TraceDelegate final : public platform::PerformanceTraceDelegate {
       calls_.push_back(call);
       threads_.push_back(std::this_thread::get_id());
     }
-    if (also) also(call);
+    if (also) {
+      also(call);
+    }
   }
 
   mutable std::mutex mutex_;
@@ -95,7 +97,9 @@ class PerformanceTraceFixture : public ::testing::Test {
         TraceParts{signposts_, fileSystem_, clock_, processFacts_, log_}, limits);
   }
   LinuxPerformanceTraceService& service() {
-    if (service_ == nullptr) make({});
+    if (service_ == nullptr) {
+      make({});
+    }
     return *service_;
   }
   Trace makeTrace(std::int32_t templateNumber = 2) {
@@ -115,7 +119,9 @@ class PerformanceTraceFixture : public ::testing::Test {
   Trace blockedTrace() {
     Trace trace = makeTrace();
     trace.delegate->also = [this](const std::string& call) {
-      if (call == "start") released_.get_future().wait();
+      if (call == "start") {
+        released_.get_future().wait();
+      }
     };
     trace.session->startTrace();
     EXPECT_TRUE(trace.delegate->waitFor("start"));
@@ -150,7 +156,9 @@ class PerformanceTraceFixture : public ::testing::Test {
     std::vector<Json> found;
     const Json trace = Json::parse(text);
     for (const Json& event : trace.at("traceEvents")) {
-      if (event.at("name") == name) found.push_back(event);
+      if (event.at("name") == name) {
+        found.push_back(event);
+      }
     }
     return found;
   }

@@ -28,8 +28,9 @@ class PropertyListSample : public ::testing::TestWithParam<const char*> {
 
 TEST_P(PropertyListSample, EveryKindOfValueReadsAsItWasWritten) {
   std::string everyByte;
-  for (int byte = 0; byte < 256; ++byte)
+  for (int byte = 0; byte < 256; ++byte) {
     everyByte += static_cast<char>(byte);
+  }
   const Value value = read("kinds");
   ASSERT_EQ(value.kind(), Kind::Dictionary);
   const Dictionary kinds = value.view().dictionary();

@@ -36,9 +36,7 @@ int countedWeek(const std::tm& day) {
 bool sharesAWeekWithNewYear(std::time_t seconds, const std::tm& day) {
   for (int i = 1; i <= 6 - day.tm_wday; ++i) {
     // At noon, so that no change of summer time moves the date.
-    if (localTime(seconds + i * kDaySeconds).tm_year != day.tm_year) {
-      return true;
-    }
+    if (localTime(seconds + i * kDaySeconds).tm_year != day.tm_year) return true;
   }
   return false;
 }

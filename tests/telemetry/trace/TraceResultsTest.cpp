@@ -114,8 +114,9 @@ TEST_F(TraceResults, SignpostsComeBeforeProbesAndAllValuesBeforeTheExtensions) {
   analysis().setProbes({probe("p", {0.002})});
   play();
   EXPECT_EQ(file().values, (Values{{"a", 1}, {"a Total", 1}, {"a AVG", 1}, {"p", 2}, {"p Total", 2}, {"p AVG", 2}}));
-  for (const auto& extension : file().extensions)
+  for (const auto& extension : file().extensions) {
     EXPECT_EQ(extension.valuesBefore, 6U);
+  }
 }
 
 TEST_F(TraceResults, EachMeasurementIsToldBeforeItIsWritten) {
@@ -205,7 +206,9 @@ TEST_F(TraceResults, ChildrenComeBeforeTheirProbeHoweverDeep) {
   play();
   Strings names;
   for (const auto& [name, value] : file().values) {
-    if (name.find(' ') == std::string::npos) names.push_back(name);
+    if (name.find(' ') == std::string::npos) {
+      names.push_back(name);
+    }
   }
   EXPECT_EQ(names, (Strings{"leaf", "a", "b", "root"}));
 }
@@ -236,8 +239,9 @@ TEST_F(TraceResults, ExtensionsAreTheKeyVariablesAndTheDatabase) {
   EXPECT_EQ(file().extensions[1].name, "@tdg-perf.database_id");
   EXPECT_EQ(file().extensions[1].members,
             (std::vector<std::pair<std::string, std::string>>{{"InfluxDB", "TarnReporter"}}));
-  for (const auto& extension : file().extensions)
+  for (const auto& extension : file().extensions) {
     EXPECT_TRUE(extension.ended);
+  }
 }
 
 TEST_F(TraceResults, TraceThatIsNotThereIsLogged) {
@@ -416,8 +420,9 @@ TEST_F(TraceResults, FileThatCannotBeMovedIsLogged) {
 TEST_F(TraceResults, ManyIntervalsKeepTheirSums) {
   constexpr int kCount = 100'000;
   std::vector<platform::SignpostInterval> intervals;
-  for (int count = 0; count < kCount; ++count)
+  for (int count = 0; count < kCount; ++count) {
     intervals.push_back(interval(count % 2 == 0 ? "even" : "odd", 0.001));
+  }
   analysis().setIntervals(intervals);
   play();
   ASSERT_EQ(file().values.size(), std::size_t{kCount} + 4);

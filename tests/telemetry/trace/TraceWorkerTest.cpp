@@ -99,8 +99,9 @@ TEST_F(TraceWorker, ProfilesHaveATemplateOfTheirOwnAndEverythingElseTheOtherUnco
       {{{"TarnReportingTraceType", 3}}, 2},
       {{{"TarnReportingTraceType", plist::Array{"sktrace_profile"}}}, 2},
   };
-  for (const auto& [configuration, number] : cases)
+  for (const auto& [configuration, number] : cases) {
     makeTestSession(configuration)->start();
+  }
   ASSERT_EQ(facility().traces().size(), cases.size());
   for (std::size_t at = 0; at < cases.size(); ++at) {
     EXPECT_EQ(facility().traces()[at].configuration.templateNumber, cases[at].second) << at;
@@ -349,7 +350,9 @@ TEST_F(TraceWorker, CompletionWithAnErrorLeavesNoTraceToAnalyse) {
 
 TEST_F(TraceWorker, CompletionTakesTheDelegateAway) {
   for (const bool fails : {false, true}) {
-    if (fails) facility().failCompletion(Error{28, "No space left on device"});
+    if (fails) {
+      facility().failCompletion(Error{28, "No space left on device"});
+    }
     const auto session = makeTestSession();
     session->start();
     EXPECT_TRUE(facility().traces().back().hasDelegate);
@@ -486,20 +489,25 @@ TEST_F(TraceWorker, AnswersFromOtherThreadsRaceWithTimeOutsAndEnds) {
   facility().callbacks().set(ReplyFault::OtherThread);
   int waited = 0;
   platform_.conditions.onWait([&waited](auto) {
-    if (++waited % 3 != 0) std::this_thread::yield();
+    if (++waited % 3 != 0) {
+      std::this_thread::yield();
+    }
     return WaitEnd::TimesOut;
   });
   for (int count = 0; count < kSessions; ++count) {
     auto session = makeTestSession();
     session->start();
-    if (count % 2 == 0) session->stop();
+    if (count % 2 == 0) {
+      session->stop();
+    }
     session.reset();
   }
   facility().callbacks().joinThreads();
   const auto traces = facility().traces();
   EXPECT_EQ(traces.size(), std::size_t{kSessions});
-  for (const auto& trace : traces)
+  for (const auto& trace : traces) {
     EXPECT_TRUE(trace.released);
+  }
 }
 
 }  // namespace
