@@ -34,7 +34,7 @@ void RecorderTattleService::createDraft(const platform::TattleDraft& draft,
   }
   detail.set("reason", displayReason);
   recorder_.record("tattle", "createDraft", payloadOf(draft), detail, clock_.epochSeconds());
-  platform::Work complete([completion = std::move(completion)]() mutable { completion(std::nullopt); });
+  platform::Work complete([completion = std::move(completion)]() mutable { completion(Status()); });
   if (!completions_.add(std::move(complete))) {
     complete();
   }
