@@ -89,7 +89,7 @@ bool EventPrinter::printNew() {
     query.after = after_;
     result = reader_.read(query);
     if (result.status == EventReader::Status::Failed) {
-      complain("can't read " + printable(path_) + ": " + printable(result.error));
+      complain("can't read " + printable(result.error));
       return false;
     }
     isMissing_ = result.status == EventReader::Status::Missing;
