@@ -26,14 +26,14 @@ void Recorder::start() {
 }
 
 void Recorder::waitUntilOpened() {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   done_.wait(mutex_, [this]() TARN_REQUIRES(mutex_) { return opened_; });
 }
 
 void Recorder::shutdown() {
   if (!thread_.joinable()) return;
   {
-    const platform::MutexLock lock(mutex_);
+    const MutexLock lock(mutex_);
     stopping_ = true;
     refusing_ = true;  // from here on events are refused, or a hail of them would put the end off for ever
   }
@@ -47,7 +47,7 @@ void Recorder::record(std::string_view backend, std::string_view name, plist::Di
   bool wake = false;
   bool refused = false;
   {
-    const platform::MutexLock lock(mutex_);
+    const MutexLock lock(mutex_);
     ++handedOver_;
     if (refusing_) [[unlikely]] {
       ++failed_;
@@ -75,12 +75,12 @@ void Recorder::record(std::string_view backend, std::string_view name, plist::Di
 }
 
 RecorderCounters Recorder::counters() const {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   return {handedOver_, committed_, handedOver_ - committed_ - failed_, expired_, failed_};
 }
 
 bool Recorder::flush(std::chrono::milliseconds timeout) {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   const std::uint64_t target = handedOver_;
   ++flushers_;
   work_.notifyOne();
@@ -95,7 +95,7 @@ void Recorder::run() {
   bool healthy = writer_.open() && writer_.settle();
   int triesLeft = options_.shutdownTries;
   {
-    const platform::MutexLock lock(mutex_);
+    const MutexLock lock(mutex_);
     opened_ = true;
     done_.notifyAll();
     for (;;) {

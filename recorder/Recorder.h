@@ -19,9 +19,9 @@
 
 #include "platform/Clock.h"
 #include "platform/Log.h"
-#include "platform/ThreadSafety.h"
 #include "platform/UniqueFunction.h"
 #include "plist/Dictionary.h"
+#include "plist/ThreadSafety.h"
 #include "recorder/EventWriter.h"
 #include "recorder/RecorderOptions.h"
 #include "recorder/store/EventBatch.h"
@@ -95,9 +95,9 @@ class Recorder {
   TimePoint nextMaintenance_;
 
   std::atomic<bool> full_{false};
-  mutable platform::Mutex mutex_;
-  platform::ConditionVariable work_;  // for the writer thread
-  platform::ConditionVariable done_;  // for those who wait for it
+  mutable Mutex mutex_;
+  ConditionVariable work_;  // for the writer thread
+  ConditionVariable done_;  // for those who wait for it
   EventBatch incoming_ TARN_GUARDED_BY(mutex_);
   TimePoint incomingSince_ TARN_GUARDED_BY(mutex_);
   std::size_t waitingBytes_ TARN_GUARDED_BY(mutex_) = 0;

@@ -37,7 +37,7 @@ Status JournalLog::unavailable() {
 
 void JournalLog::write(const platform::LogEntry& entry) noexcept {
   try {
-    const platform::MutexLock lock(mutex_);
+    const MutexLock lock(mutex_);
     int error = 0;
     if (lost_ > 0) {
       constexpr std::string_view kModule = "JournalLog";
@@ -55,7 +55,7 @@ void JournalLog::write(const platform::LogEntry& entry) noexcept {
       lostError_ = error;
     }
   } catch (const std::exception&) {  // no memory for the fields
-    const platform::MutexLock lock(mutex_);
+    const MutexLock lock(mutex_);
     ++lost_;
     lostError_ = ENOMEM;
   }

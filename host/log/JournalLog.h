@@ -17,8 +17,8 @@
 #include <string>
 
 #include "platform/Log.h"
-#include "platform/ThreadSafety.h"
 #include "plist/Result.h"
+#include "plist/ThreadSafety.h"
 
 namespace tarn::linux_host {
 
@@ -41,7 +41,7 @@ class JournalLog final : public platform::Log {
   int sendEntry(const platform::LogEntry& entry);
 
   const Send send_;
-  platform::Mutex mutex_;
+  Mutex mutex_;
   std::uint64_t lost_ TARN_GUARDED_BY(mutex_) = 0;
   int lostError_ TARN_GUARDED_BY(mutex_) = 0;
 };

@@ -27,7 +27,7 @@ LineLog::LineLog(const platform::Clock& clock, platform::LogLevel threshold) : c
 void LineLog::write(const platform::LogEntry& entry) noexcept {
   try {
     const std::string line = logLine(clock_.epochSeconds(), entry);
-    const platform::MutexLock lock(mutex_);
+    const MutexLock lock(mutex_);
     int error = lost_ == 0 ? 0 : writeLost();
     if (error == 0) {
       error = writeWhole(line);
@@ -37,7 +37,7 @@ void LineLog::write(const platform::LogEntry& entry) noexcept {
       lostError_ = error;
     }
   } catch (const std::exception&) {  // no memory for a line
-    const platform::MutexLock lock(mutex_);
+    const MutexLock lock(mutex_);
     ++lost_;
     lostError_ = ENOMEM;
   }

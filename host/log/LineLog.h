@@ -13,7 +13,7 @@
 
 #include "platform/Clock.h"
 #include "platform/Log.h"
-#include "platform/ThreadSafety.h"
+#include "plist/ThreadSafety.h"
 
 namespace tarn::linux_host {
 
@@ -39,7 +39,7 @@ class LineLog : public platform::Log {
 
   const platform::Clock& clock_;
   bool mayStall_ = false;  // constant after construction
-  platform::Mutex mutex_;
+  Mutex mutex_;
   std::uint64_t lost_ TARN_GUARDED_BY(mutex_) = 0;
   int lostError_ TARN_GUARDED_BY(mutex_) = 0;
   bool torn_ TARN_GUARDED_BY(mutex_) = false;  // the last line was cut off in the middle

@@ -22,7 +22,7 @@ ServerQueue::ServerQueue(const platform::Clock& clock, QueueProgress& progress)
 void ServerQueue::async(platform::Work work) {
   bool wakeServer = false;
   {
-    const platform::MutexLock lock(mutex_);
+    const MutexLock lock(mutex_);
     incoming_.push_back(std::move(work));
     ready_.fetch_add(1, std::memory_order_relaxed);
     wakeServer = mustWake();
@@ -40,7 +40,7 @@ void ServerQueue::asyncAfter(std::chrono::nanoseconds delay, platform::Work work
   const auto deadline = deadlineAfter(clock_.monotonic(), delay);
   bool wakeServer = false;
   {
-    const platform::MutexLock lock(mutex_);
+    const MutexLock lock(mutex_);
     delayed_.add(deadline, std::move(work));
     wakeServer = deadline < sleepsUntil_ && mustWake();
   }
@@ -54,14 +54,14 @@ bool ServerQueue::isCurrent() const noexcept {
 }
 
 std::size_t ServerQueue::waiting() const noexcept {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   return ready() + (delayed_.empty() ? 0 : delayed_.dueCount(clock_.monotonic()));
 }
 
 void ServerQueue::wake() {
   bool wakeServer = false;
   {
-    const platform::MutexLock lock(mutex_);
+    const MutexLock lock(mutex_);
     woken_ = true;
     wakeServer = mustWake();
   }
@@ -89,7 +89,7 @@ bool ServerQueue::refill() {
   if (batch_.capacity() > kKeptPieces) {
     batch_ = std::vector<platform::Work>();
   }
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   if (!delayed_.empty()) {
     const auto now = clock_.monotonic();
     while (delayed_.due(now)) {
@@ -104,7 +104,7 @@ bool ServerQueue::refill() {
 std::optional<std::chrono::nanoseconds> ServerQueue::prepareToSleep() {
   using std::chrono::nanoseconds;
   if (ready() != 0) return nanoseconds::zero();
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   if (ready() != 0 || std::exchange(woken_, false)) return nanoseconds::zero();
   std::optional<nanoseconds> timeout;
   sleepsUntil_ = nanoseconds::max();
@@ -119,7 +119,7 @@ std::optional<std::chrono::nanoseconds> ServerQueue::prepareToSleep() {
 }
 
 bool ServerQueue::prepareToWait() {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   if (std::exchange(woken_, false)) return false;
   sleepsUntil_ = {};  // what is delayed stays so
   sleeping_ = true;
@@ -127,7 +127,7 @@ bool ServerQueue::prepareToWait() {
 }
 
 void ServerQueue::awake() {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   sleeping_ = false;
 }
 

@@ -22,8 +22,8 @@
 #include "host/loop/QueueProgress.h"
 #include "host/system/UniqueDescriptor.h"
 #include "platform/Clock.h"
-#include "platform/ThreadSafety.h"
 #include "platform/WorkQueue.h"
+#include "plist/ThreadSafety.h"
 
 namespace tarn::linux_host {
 
@@ -74,7 +74,7 @@ class ServerQueue final : public platform::WorkQueue {
   std::vector<platform::Work> batch_;
   std::size_t next_ = 0;
 
-  mutable platform::Mutex mutex_;
+  mutable Mutex mutex_;
   std::vector<platform::Work> incoming_ TARN_GUARDED_BY(mutex_);
   DelayedWork<platform::Work> delayed_ TARN_GUARDED_BY(mutex_);
   bool sleeping_ TARN_GUARDED_BY(mutex_) = false;

@@ -19,7 +19,7 @@ void Watchdog::start() {
 
 void Watchdog::stop() {
   {
-    const platform::MutexLock lock(mutex_);
+    const MutexLock lock(mutex_);
     stopping_ = true;
   }
   changed_.notifyAll();

@@ -10,7 +10,7 @@
 #include "host/loop/QueueProgress.h"
 #include "host/loop/ServiceManager.h"
 #include "platform/Clock.h"
-#include "platform/ThreadSafety.h"
+#include "plist/ThreadSafety.h"
 
 namespace tarn::linux_host {
 
@@ -43,8 +43,8 @@ class Watchdog {
   const QueueProgress& progress_;
   ServiceManager& manager_;
   QueueProgress::Sample before_;  // of the last look
-  platform::Mutex mutex_;
-  platform::ConditionVariable changed_;
+  Mutex mutex_;
+  ConditionVariable changed_;
   bool stopping_ TARN_GUARDED_BY(mutex_) = false;
   std::thread thread_;
 };

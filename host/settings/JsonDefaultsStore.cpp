@@ -68,7 +68,7 @@ JsonDefaultsStore::Suite JsonDefaultsStore::suite(std::string_view name) const {
   const std::string path = pathOf(name);
   struct stat facts {};
   const Stamp now = stampOf(::stat(path.c_str(), &facts), facts);
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   auto at = cache_.find(name);
   if (at == cache_.end()) {
     if (cache_.size() == kMaximumCachedSuites) {
