@@ -1,5 +1,6 @@
 #include "host/HostSetup.h"
 
+#include <chrono>
 #include <utility>
 
 #include "host/log/LogTarget.h"
@@ -8,6 +9,9 @@
 namespace tarn::linux_host {
 
 namespace {
+
+// A log whose reader is stuck must not hold up the end.
+constexpr std::chrono::milliseconds kLastWhileOfTheLog{500};
 
 // The listening socket: the one handed over, else the right to the one named.
 ListenSocket::Result openSocket(const ServiceOptions& options) {
@@ -43,9 +47,13 @@ std::optional<Refusal> HostSetup::prepare(const ServiceOptions& options) {
   if (std::string error = holdStateDirectory(options.stateDirectory, stateLock_); !error.empty()) {
     return Refusal{std::move(error)};
   }
-  OpenedLog opening = openLog(options.logTarget, options.logLevel, clock);
-  log = std::move(opening.log);
-  return log ? std::nullopt : std::optional<Refusal>(std::in_place, std::move(opening.error));
+  auto opening = openLog(options.logTarget, options.logLevel, clock);
+  log = std::move(opening.value);
+  return log ? std::nullopt : std::optional<Refusal>(std::in_place, std::move(opening.error->text));
+}
+
+void HostSetup::settleLog() {
+  static_cast<void>(log->settle(kLastWhileOfTheLog));
 }
 
 std::optional<Refusal> HostSetup::readSettings(const ServiceOptions& options) {

@@ -8,6 +8,7 @@
 #include <optional>
 #include <string>
 
+#include "host/log/QueuedLog.h"
 #include "host/loop/SignalSource.h"
 #include "host/machine/LinuxClock.h"
 #include "host/settings/HostConfiguration.h"
@@ -15,7 +16,6 @@
 #include "host/settings/ServiceOptions.h"
 #include "host/socket/ListenSocket.h"
 #include "host/system/FileLock.h"
-#include "platform/Log.h"
 
 namespace tarn::linux_host {
 
@@ -33,13 +33,15 @@ class HostSetup {
 
   // Called once. What is in the way, if anything; then nothing else may be used.
   [[nodiscard]] std::optional<Refusal> prepare(const ServiceOptions& options);
+  // Gives what was logged a last while to be written; the process may end then.
+  void settleLog();
 
   HostConfiguration configuration;
   JsonDeviceProperties deviceProperties;
   std::shared_ptr<SignalSource> signals;
   ListenSocket socket;
   LinuxClock clock;
-  std::unique_ptr<platform::Log> log;
+  std::unique_ptr<QueuedLog> log;
 
  private:
   std::optional<Refusal> readSettings(const ServiceOptions& options);

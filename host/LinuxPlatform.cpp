@@ -38,13 +38,14 @@ std::vector<FlumeSource*> sources(FlumeFiles& files, std::optional<AlsaFlume>& a
 }  // namespace
 
 LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::string& stateDirectory,
-                             JsonDeviceProperties deviceProperties, const Ground& ground)
+                             JsonDeviceProperties deviceProperties, Ground ground)
     : settleTime_(configuration.limits.settleTime),
       // Not the machine's own: the names in it are known beforehand, and nobody else is to be in the way.
       temporaryDirectory_(stateDirectory + "/tmp"),
       clock_(ground.clock),
       log_(ground.log),
       serviceManager_(ground.serviceManager),
+      settleLog_(std::move(ground.settleLog)),
       loop_(clock_),
       connections_(loop_, log_, withinTheSystem(configuration.limits)),
       recorder_(inFolder(configuration.recorder, stateDirectory), log_, clock_),
@@ -162,6 +163,9 @@ void LinuxPlatform::end() {
   settleQueues();
   performanceTrace_.shutdown();  // a trace that isn't finished leaves no half file
   recorder_.shutdown();
+  if (settleLog_) {
+    settleLog_();
+  }
 }
 
 // What the workers' own queues hold reaches the recorder too, unless a back-end keeps it waiting.

@@ -64,11 +64,12 @@ class LinuxPlatform final : private platform::ProcessControl {
     platform::Clock& clock;
     platform::Log& log;
     ServiceManager& serviceManager;
+    platform::UniqueFunction<void()> settleLog = {};  // the last thing before the process ends
   };
 
   // The state directory is one that prepareStateDirectory() made.
   LinuxPlatform(const HostConfiguration& configuration, const std::string& stateDirectory,
-                JsonDeviceProperties deviceProperties, const Ground& ground);
+                JsonDeviceProperties deviceProperties, Ground ground);
   LinuxPlatform(const LinuxPlatform&) = delete;
   LinuxPlatform& operator=(const LinuxPlatform&) = delete;
   ~LinuxPlatform() override = default;
@@ -96,6 +97,7 @@ class LinuxPlatform final : private platform::ProcessControl {
   platform::Clock& clock_;
   platform::Log& log_;
   ServiceManager& serviceManager_;
+  platform::UniqueFunction<void()> settleLog_;
   MainLoop loop_;
   ConnectionHost connections_;
   recorder::Recorder recorder_;

@@ -84,6 +84,8 @@ int main(int argumentCount, char** arguments) {
   }
   ServiceManager serviceManager;
   LinuxPlatform platform(setup.configuration, command.options->stateDirectory, setup.deviceProperties,
-                         {setup.clock, *setup.log, serviceManager});
-  std::_Exit(serve(platform, setup));  // other threads still use the platform's parts
+                         {setup.clock, *setup.log, serviceManager, [&setup] { setup.settleLog(); }});
+  const int status = serve(platform, setup);
+  setup.settleLog();
+  std::_Exit(status);  // other threads still use the platform's parts
 }
