@@ -6,7 +6,7 @@
 #include <limits>
 #include <utility>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 #include "host/settings/StateFolder.h"
 #include "host/system/DescriptorLimit.h"
 
@@ -174,8 +174,8 @@ void LinuxPlatform::settleQueues() {
   while (!workQueues_.settle(settleTime_)) {
     const std::size_t before = std::exchange(left, workQueues_.unfinished());
     if (left >= before) {
-      hostLog(log_, kHostCategory, platform::LogLevel::Default, kModule,
-              std::to_string(left) + " pieces of work of the workers' queues are left undone");
+      logPrefixed(log_, kHostCategory, platform::LogLevel::Default, kModule,
+                  std::to_string(left) + " pieces of work of the workers' queues are left undone");
       return;
     }
   }

@@ -12,7 +12,7 @@
 #include "derived/TarnReportingSystemMonitor.h"
 #include "host/HostSetup.h"
 #include "host/LinuxPlatform.h"
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 #include "host/loop/ServiceManager.h"
 #include "host/loop/SignalSource.h"
 #include "host/settings/HostPaths.h"
@@ -39,8 +39,8 @@ std::shared_ptr<TarnReportingService> makeService(platform::Log& log) {
   TarnReportingSession::setAllWorkerClasses(TarnReportingWorkerClasses());
   std::shared_ptr<TarnReportingService> service = TarnReportingService::create();
   if (TarnReportingSystemMonitor::TarnReportingDefaults()["disable_reporting"].asBool()) {
-    hostLog(log, kHostCategory, platform::LogLevel::Default, kModule,
-            "reporting is disabled by the service's defaults");
+    logPrefixed(log, kHostCategory, platform::LogLevel::Default, kModule,
+                "reporting is disabled by the service's defaults");
     service->setReportingEnabled(false);
   }
   return service;

@@ -6,7 +6,7 @@
 #include <iterator>
 #include <utility>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 #include "host/system/FolderNames.h"
 #include "host/system/SmallFile.h"
 #include "plist/EscapedText.h"
@@ -118,7 +118,7 @@ void FlumeFiles::complain(const std::string& name, const std::string& complaint)
   plist::appendEscapedControls(text, name.empty() ? folder_ : name);
   text += ' ';
   text += complaint;
-  hostLog(log_, kDriverCategory, platform::LogLevel::Error, kModule, text);
+  logPrefixed(log_, kDriverCategory, platform::LogLevel::Error, kModule, text);
 }
 
 }  // namespace tarn::linux_host

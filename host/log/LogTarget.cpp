@@ -5,8 +5,8 @@
 #include <utility>
 
 #include "host/log/FileOutput.h"
-#include "host/log/HostLog.h"
 #include "host/log/LineOutput.h"
+#include "host/log/PrefixedLog.h"
 
 namespace tarn::linux_host {
 
@@ -42,7 +42,7 @@ platform::Outcome<std::unique_ptr<QueuedLog>> openLog(std::string_view target, p
   auto log = std::make_unique<QueuedLog>(std::move(output), clock, threshold);
   log->start();
   if (!fallback.empty()) {
-    hostLog(*log, kHostCategory, platform::LogLevel::Error, kModule, fallback);
+    logPrefixed(*log, kHostCategory, platform::LogLevel::Error, kModule, fallback);
   }
   return {std::move(log), {}};
 }

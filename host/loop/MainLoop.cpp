@@ -5,7 +5,7 @@
 #include <cerrno>
 #include <utility>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 
 namespace tarn::linux_host {
 

@@ -6,7 +6,7 @@
 #include <cerrno>
 #include <csignal>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 
 namespace tarn::linux_host {
 

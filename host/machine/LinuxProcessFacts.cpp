@@ -12,7 +12,7 @@
 #include <utility>
 #include <vector>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 #include "host/system/SmallFile.h"
 #include "wire/Utf8.h"
 

@@ -16,7 +16,7 @@
 #pragma pop_macro("TOML_UNREACHABLE")
 #include <toml++/toml.h>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 #include "host/system/SmallFile.h"
 #include "plist/EscapedText.h"
 

@@ -8,7 +8,7 @@
 #include <optional>
 #include <utility>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 #include "host/settings/StateFolder.h"
 #include "host/system/FileLock.h"
 #include "host/system/FileReplacement.h"
@@ -60,7 +60,7 @@ plist::Value JsonDefaultsStore::preference(std::string_view key, std::string_vie
 bool JsonDefaultsStore::setValue(std::string_view suiteName, std::string_view key, const plist::ValueView& value) {
   const std::string fault = store(suiteName, key, value);
   if (!fault.empty()) {
-    hostLog(log_, kHostCategory, platform::LogLevel::Error, kModule, "defaults not written: " + fault);
+    logPrefixed(log_, kHostCategory, platform::LogLevel::Error, kModule, "defaults not written: " + fault);
   }
   return fault.empty();
 }
@@ -169,8 +169,8 @@ void JsonDefaultsStore::logFault(Cached& cached) const {
   }
   cached.loggedFault = cached.suite.fault;
   cached.loggedStamp = cached.stamp;
-  hostLog(log_, kHostCategory, platform::LogLevel::Error, kModule,
-          "defaults file is broken and reads as empty: " + cached.suite.fault);
+  logPrefixed(log_, kHostCategory, platform::LogLevel::Error, kModule,
+              "defaults file is broken and reads as empty: " + cached.suite.fault);
 }
 
 }  // namespace tarn::linux_host

@@ -5,7 +5,7 @@
 #include <cstddef>
 #include <utility>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 #include "host/system/JsonValues.h"
 #include "host/system/SmallFile.h"
 

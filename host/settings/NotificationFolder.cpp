@@ -8,7 +8,7 @@
 #include <cerrno>
 #include <chrono>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 #include "host/settings/StateFolder.h"
 #include "host/system/FileLock.h"
 #include "host/system/UniqueDescriptor.h"

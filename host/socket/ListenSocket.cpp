@@ -10,7 +10,7 @@
 #include <cerrno>
 #include <cstring>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 
 namespace tarn::linux_host {
 

@@ -6,7 +6,7 @@
 #include <algorithm>
 #include <cerrno>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 #include "wire/Encoder.h"
 
 namespace tarn::linux_host {
@@ -275,7 +275,8 @@ void SocketConnection::peerEnded(bool reset) {
 
 void SocketConnection::cut(CutReason reason, const std::string& why) {
   host_.ledger.countCut(reason);
-  hostLog(host_.log, kConnectionCategory, platform::LogLevel::Error, kModule, "cut off " + description() + ": " + why);
+  logPrefixed(host_.log, kConnectionCategory, platform::LogLevel::Error, kModule,
+              "cut off " + description() + ": " + why);
   beginEnd(true);
 }
 

@@ -5,7 +5,7 @@
 
 #include <cerrno>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 #include "host/socket/SocketConnection.h"
 
 namespace tarn::linux_host {
@@ -25,7 +25,7 @@ SocketListener::SocketListener(ConnectionHost& host, ListenSocket socket) : host
 SocketListener::~SocketListener() = default;
 
 void SocketListener::resume() {
-  hostLog(host_.log, kHostCategory, platform::LogLevel::Default, kModule, "listening on " + socket_.name());
+  logPrefixed(host_.log, kHostCategory, platform::LogLevel::Default, kModule, "listening on " + socket_.name());
   startAccepting();
 }
 
@@ -70,7 +70,8 @@ void SocketListener::pauseAccepting(const std::string& why) {
   }
   ++host_.ledger.acceptPauses;
   if (!std::exchange(shortage_, true)) {
-    hostLog(host_.log, kHostCategory, platform::LogLevel::Error, kModule, why + "; clients wait until there is room");
+    logPrefixed(host_.log, kHostCategory, platform::LogLevel::Error, kModule,
+                why + "; clients wait until there is room");
   }
   host_.loop.queue()->asyncAfter(kAcceptPause, [weak = weak_from_this()] {
     if (const auto self = weak.lock()) {
@@ -81,7 +82,7 @@ void SocketListener::pauseAccepting(const std::string& why) {
 
 void SocketListener::take(UniqueDescriptor client) {
   if (std::exchange(shortage_, false)) {
-    hostLog(host_.log, kHostCategory, platform::LogLevel::Default, kModule, "accepting clients again");
+    logPrefixed(host_.log, kHostCategory, platform::LogLevel::Default, kModule, "accepting clients again");
   }
   const auto delegate = delegate_.lock();
   if (delegate == nullptr) {

@@ -2,7 +2,7 @@
 
 #include <utility>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 #include "host/traces/TraceThread.h"
 
 namespace tarn::linux_host {
@@ -63,7 +63,7 @@ std::shared_ptr<platform::PerformanceTraceSession> LinuxPerformanceTraceService:
   std::string complaint = complaintOf(configuration);
   if (complaint.empty() && !thread_->run()) complaint = "performance traces have no thread to run on";
   if (!complaint.empty()) {
-    hostLog(parts_.log, kTraceCategory, platform::LogLevel::Error, kModule, complaint);
+    logPrefixed(parts_.log, kTraceCategory, platform::LogLevel::Error, kModule, complaint);
     return nullptr;
   }
   return std::make_shared<Session>(
