@@ -15,6 +15,9 @@ namespace tarn::linux_host {
 namespace {
 
 constexpr std::string_view kModule = "LinuxPlatform";
+// What a commit to a slow disk may take, as it is told to the service manager.
+constexpr std::chrono::seconds kLongestCommit{15};
+constexpr std::chrono::seconds kLongestFlush{10};
 
 HostLimits withinTheSystem(HostLimits limits) {
   limits.maxConnections = std::min(limits.maxConnections, connectionsWithin(raiseDescriptorLimit()));
@@ -40,6 +43,7 @@ std::vector<FlumeSource*> sources(FlumeFiles& files, std::optional<AlsaFlume>& a
 LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::string& stateDirectory,
                              JsonDeviceProperties deviceProperties, Ground ground)
     : settleTime_(configuration.limits.settleTime),
+      endTime_(configuration.limits.endTime),
       // Not the machine's own: the names in it are known beforehand, and nobody else is to be in the way.
       temporaryDirectory_(stateDirectory + "/tmp"),
       clock_(ground.clock),
@@ -104,6 +108,7 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
   recorder_.setRoomHandler([this] { connections_.resumeRequests(); });
   workQueues_.setRoomHandler([this] { connections_.resumeRequests(); });
   connections_.gate.setPauseSource([this] { return recorder_.isFull() || workQueues_.isFull(); });
+  loop_.addTurnHook([this] { lookForTheEnd(); });
 }
 
 std::string LinuxPlatform::start() {
@@ -135,8 +140,46 @@ std::string LinuxPlatform::listen(ListenSocket socket, const std::shared_ptr<pla
   return {};
 }
 
+void LinuxPlatform::endClients(platform::UniqueFunction<void()> clientsAreGone) {
+  if (std::exchange(ending_, true)) {
+    return;
+  }
+  serviceManager_.notifyStopping(endTime_);
+  logPrefixed(log_, kHostCategory, platform::LogLevel::Default, kModule,
+              "ending: " + std::to_string(connections_.ledger.connectionsOpen) + " connections are open");
+  clientsAreGone_ = std::move(clientsAreGone);
+  endDeadline_.start(endTime_, [this] { giveUpClients(); });
+  listener_->close();
+  connections_.endInputs();
+}
+
+// Once a turn: when the last client's end was served, the loop may stop.
+void LinuxPlatform::lookForTheEnd() {
+  if (!clientsAreGone_ || connections_.ledger.connectionsOpen != 0 || loop_.queue()->ready() != 0) {
+    return;
+  }
+  std::exchange(clientsAreGone_, {})();
+  loop_.stop();
+}
+
+// On a thread of its own, while the loop's may be stuck in somebody's work: only what any thread may do.
+void LinuxPlatform::giveUpClients() {
+  serviceManager_.notifyStopping(kLongestCommit);
+  logPrefixed(
+      log_, kHostCategory, platform::LogLevel::Error, kModule,
+      "the clients' ends are not served within " + std::to_string(endTime_.count()) + " ms; what is left is dropped");
+  if (!recorder_.flush(kLongestFlush)) {
+    logPrefixed(log_, kHostCategory, platform::LogLevel::Error, kModule, "not everything could be committed");
+  }
+  if (settleLog_) {
+    settleLog_();
+  }
+  std::_Exit(0);
+}
+
 void LinuxPlatform::serve() {
   loop_.run();
+  endDeadline_.cancel();
   loop_.queue()->run(std::numeric_limits<std::size_t>::max());  // requests that were taken are served
   loop_.flushAll();
   end();
@@ -157,7 +200,8 @@ plist::Dictionary LinuxPlatform::status() {
 
 // Takes no more, and makes safe what was taken.
 void LinuxPlatform::end() {
-  serviceManager_.notifyStopping();
+  endDeadline_.cancel();  // of one that is killed while it ends
+  serviceManager_.notifyStopping(kLongestCommit);
   watchdog_.stop();
   listener_->close();
   settleQueues();

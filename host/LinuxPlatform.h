@@ -2,8 +2,9 @@
 // its stand-ins for the back-ends; it hands them out as Facilities, and knows what holds between them: what comes in is
 // held up while what it becomes piles up, what `status` answers, and in which order all of it ends.
 //
-// Life: start() makes what has threads; listen() lets clients come; serve() lasts until the loop is stopped. The
-// process then ends at once, as it does in exitProcess(): sessions are not stopped, what was taken is made safe.
+// Life: start() makes what has threads; listen() lets clients come; serve() lasts until the loop is stopped, after
+// which what was taken is safe and the process ends at once. endClients() is the end in order: each client's is served
+// as if its connection had closed, then the loop stops. exitProcess() stops no session.
 //
 // Owned by the entry point. Threads: the main loop's, which is the one that calls serve().
 #pragma once
@@ -17,6 +18,7 @@
 #include "host/drivers/FlumeFiles.h"
 #include "host/drivers/LinuxFlumeService.h"
 #include "host/loop/LinuxConditions.h"
+#include "host/loop/Deadline.h"
 #include "host/loop/LinuxWorkQueues.h"
 #include "host/loop/MainLoop.h"
 #include "host/loop/ServiceManager.h"
@@ -84,6 +86,11 @@ class LinuxPlatform final : private platform::ProcessControl {
   [[nodiscard]] std::string listen(ListenSocket socket, const std::shared_ptr<platform::ListenerDelegate>& delegate,
                                    SessionCount sessionCount);
   // Serves until the loop is stopped, then serves the requests that were taken and makes safe what the recorder holds.
+  // Takes nobody and nothing more in, serves what each client had sent and then its end, calls `clientsAreGone` and
+  // stops the loop. What isn't over by `HostLimits::endTime` is left: what the recorder holds is committed then and the
+  // process ends with status 0, whatever the queue is at. A second call does nothing. On the loop's thread, from work
+  // or an event of it.
+  void endClients(platform::UniqueFunction<void()> clientsAreGone);
   void serve();
 
  private:
@@ -91,10 +98,13 @@ class LinuxPlatform final : private platform::ProcessControl {
   plist::Dictionary status();
   void end();
   void settleQueues();
+  void lookForTheEnd();
+  void giveUpClients();
 
   const std::chrono::milliseconds settleTime_;
   const std::string temporaryDirectory_;
   platform::Clock& clock_;
+  const std::chrono::milliseconds endTime_;
   platform::Log& log_;
   ServiceManager& serviceManager_;
   platform::UniqueFunction<void()> settleLog_;
@@ -134,3 +144,6 @@ class LinuxPlatform final : private platform::ProcessControl {
 };
 
 }  // namespace tarn::linux_host
+  platform::UniqueFunction<void()> clientsAreGone_;  // set while the clients' ends are served
+  bool ending_ = false;
+  Deadline endDeadline_;

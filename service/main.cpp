@@ -1,7 +1,7 @@
 // tarnreportingd: options, platform, service, serve. It owns no behaviour; what a part does is told where the part is.
 //
-// The process ends without tearing the parts down: what the back-ends hold is committed, then it exits at once.
-// Sessions are not stopped.
+// A signal ends the clients in order, with their sessions. The process then ends without tearing the parts down: what
+// the back-ends hold is committed, then it exits at once.
 #include <cstdlib>
 #include <iostream>
 #include <memory>
@@ -52,11 +52,16 @@ int serve(LinuxPlatform& platform, HostSetup& setup) {
   if (std::string error = platform.start(); !error.empty()) {
     return refuse({std::move(error)});
   }
-  if (std::string error = SignalSource::start(setup.signals, loop, [&loop](int) { loop.stop(); }); !error.empty()) {
+  std::shared_ptr<TarnReportingService> service;  // before any signal is served
+  const auto endInOrder = [&platform, &service](int) {
+    service->announceEnd();
+    platform.endClients([&service] { service->endSingleMessageSession(); });
+  };
+  if (std::string error = SignalSource::start(setup.signals, loop, endInOrder); !error.empty()) {
     return refuse({std::move(error)});
   }
   TarnReportingInstallFacilities(&platform.facilities());
-  const std::shared_ptr<TarnReportingService> service = makeService(*setup.log);
+  service = makeService(*setup.log);
   // Only now is there anything to connect to: who can reach the service finds it whole, its notifications heard.
   if (std::string error =
           platform.listen(std::move(setup.socket), service, [&service] { return service->sessionCount(); });

@@ -15,7 +15,7 @@ constexpr const char* kPurpose = "Gathers audio analytics: serves reporting sess
 constexpr const char* kFooter =
     "The listener is the socket that the service manager hands over (LISTEN_FDS), else --socket. SIGTERM and SIGINT "
     "end\n"
-    "the service once everything that it recorded is on disk.\n"
+    "each client and its sessions, then the service, once everything that it recorded is on disk.\n"
     "\n"
     "Exit status: 0 after SIGTERM, SIGINT, --help and --version; 1 when it can't serve (the state directory, the "
     "socket\n"

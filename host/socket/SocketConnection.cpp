@@ -46,6 +46,7 @@ void SocketConnection::resume() {
   }
   state_ = State::Open;
   ++host_.ledger.connectionsOpen;
+  host_.add(*this);
   ++host_.ledger.connectionsTotal;
   watch(EPOLLIN);
 }
@@ -165,6 +166,13 @@ void SocketConnection::goOn() {
 }
 
 bool SocketConnection::takesReplies() noexcept {
+// The socket then yields what came before and its end, in this order.
+void SocketConnection::endInput() {
+  if (socket_) {
+    ::shutdown(socket_.get(), SHUT_RD);
+  }
+}
+
   if ((state_ == State::Open || state_ == State::Ending) && !outputBroken_) {
     return true;
   }
@@ -300,6 +308,7 @@ void SocketConnection::finish(bool interrupted) {
   --host_.ledger.connectionsOpen;
   if (auto handler = std::exchange(interruptionHandler_, {}); handler && interrupted) {
     handler();
+  host_.remove(*this);
   }
   if (auto handler = std::exchange(invalidationHandler_, {})) {
     handler();

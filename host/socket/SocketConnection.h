@@ -27,6 +27,7 @@ class SocketConnection final : public platform::Connection,
                                public EventHandler,
                                public HeldConnection,
                                public ReplySink,
+                               public OpenConnection,
                                public std::enable_shared_from_this<SocketConnection> {
  public:
   // Takes over a connected socket that doesn't block. `number` names it in logs. The host outlives the connection.
@@ -49,6 +50,7 @@ class SocketConnection final : public platform::Connection,
   void sendReply(std::uint64_t id, std::initializer_list<plist::ValueView> results) override;
   void sendNumbers(std::uint64_t id, std::span<const std::int64_t> numbers) override;
   void sendError(std::uint64_t id, const platform::RemoteError& error) override;
+  void endInput() override;
   void dropReply() override { ++host_.ledger.repliesDropped; }
 
  private:
