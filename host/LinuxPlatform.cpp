@@ -52,6 +52,7 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
       settleLog_(std::move(ground.settleLog)),
       loop_(clock_),
       connections_(loop_, log_, withinTheSystem(configuration.limits)),
+      recorderEnabled_(configuration.recorderEnabled),
       recorder_(inFolder(configuration.recorder, stateDirectory), log_, clock_),
       workQueues_(clock_, loop_.queue(), configuration.limits.poolWork),
       tally_(recorder_, clock_, configuration.tally.inUse),
@@ -77,38 +78,44 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
       traceAnalysis_(configuration.paths.traceAnalysis.value_or(LinuxTraceAnalysis::defaultPath()), log_),
       deviceProperties_(std::move(deviceProperties)),
       watchdog_(clock_, loop_.progress(), serviceManager_),
-      facilities_{.clock = clock_,
-                  .workQueues = workQueues_,
-                  .conditions = conditions_,
-                  .log = log_,
-                  .tracePoints = tracePoints_,
-                  .deviceProperties = deviceProperties_,
-                  .defaults = defaults_,
-                  .notifications = *notifications_,
-                  .processFacts = processFacts_,
-                  .processControl = *this,
-                  .tally = tally_,
-                  .fileSystem = fileSystem_,
-                  .localCalendar = localCalendar_,
-                  .randomSource = randomSource_,
-                  .processEnvironment = processEnvironment_,
-                  .commandRunner = commandRunner_,
-                  .wattlog = &wattlog_,
-                  .pylon = &pylon_,
-                  .snare = &snare_,
-                  .tattle = &tattle_,
-                  .gyre = &gyre_,
-                  .flume = &flume_,
-                  .rtcReporting = &rtc_,
-                  .performanceTrace = &performanceTrace_,
-                  .traceAnalysis = &traceAnalysis_,
-                  .perfDataWriters = &perfDataWriters_,
-                  .signposts = &signposts_} {
+      facilities_(facilitiesOf()) {
   // What comes in is held up while what it becomes piles up.
   recorder_.setRoomHandler([this] { connections_.resumeRequests(); });
   workQueues_.setRoomHandler([this] { connections_.resumeRequests(); });
   connections_.gate.setPauseSource([this] { return recorder_.isFull() || workQueues_.isFull(); });
   loop_.addTurnHook([this] { lookForTheEnd(); });
+}
+
+platform::Facilities LinuxPlatform::facilitiesOf() {
+  const auto standIn = [this](auto& service) { return recorderEnabled_ ? &service : nullptr; };
+  platform::TallyService& tally = recorderEnabled_ ? static_cast<platform::TallyService&>(tally_) : noTally_;
+  return platform::Facilities{.clock = clock_,
+                              .workQueues = workQueues_,
+                              .conditions = conditions_,
+                              .log = log_,
+                              .tracePoints = tracePoints_,
+                              .deviceProperties = deviceProperties_,
+                              .defaults = defaults_,
+                              .notifications = *notifications_,
+                              .processFacts = processFacts_,
+                              .processControl = *this,
+                              .tally = tally,
+                              .fileSystem = fileSystem_,
+                              .localCalendar = localCalendar_,
+                              .randomSource = randomSource_,
+                              .processEnvironment = processEnvironment_,
+                              .commandRunner = commandRunner_,
+                              .wattlog = standIn(wattlog_),
+                              .pylon = standIn(pylon_),
+                              .snare = standIn(snare_),
+                              .tattle = standIn(tattle_),
+                              .gyre = standIn(gyre_),
+                              .flume = &flume_,
+                              .rtcReporting = standIn(rtc_),
+                              .performanceTrace = &performanceTrace_,
+                              .traceAnalysis = &traceAnalysis_,
+                              .perfDataWriters = &perfDataWriters_,
+                              .signposts = &signposts_};
 }
 
 std::string LinuxPlatform::start() {
@@ -118,9 +125,11 @@ std::string LinuxPlatform::start() {
   if (const int error = makeFolder(temporaryDirectory_, 0750); error != 0) {
     return temporaryDirectory_ + errorSuffix(error);
   }
-  recorder_.start();
-  // A large file is read through first; until that is over nothing could be committed in time.
-  recorder_.waitUntilOpened();
+  if (recorderEnabled_) {
+    recorder_.start();
+    // A large file is read through first; until that is over nothing could be committed in time.
+    recorder_.waitUntilOpened();
+  }
   return {};
 }
 

@@ -14,11 +14,12 @@
 #include <string>
 #include <vector>
 
+#include "host/NoTallyService.h"
 #include "host/drivers/AlsaFlume.h"
 #include "host/drivers/FlumeFiles.h"
 #include "host/drivers/LinuxFlumeService.h"
-#include "host/loop/LinuxConditions.h"
 #include "host/loop/Deadline.h"
+#include "host/loop/LinuxConditions.h"
 #include "host/loop/LinuxWorkQueues.h"
 #include "host/loop/MainLoop.h"
 #include "host/loop/ServiceManager.h"
@@ -85,35 +86,38 @@ class LinuxPlatform final : private platform::ProcessControl {
   // Lets clients connect, once whoever they are handed to is whole. What went wrong, or nothing.
   [[nodiscard]] std::string listen(ListenSocket socket, const std::shared_ptr<platform::ListenerDelegate>& delegate,
                                    SessionCount sessionCount);
-  // Serves until the loop is stopped, then serves the requests that were taken and makes safe what the recorder holds.
   // Takes nobody and nothing more in, serves what each client had sent and then its end, calls `clientsAreGone` and
   // stops the loop. What isn't over by `HostLimits::endTime` is left: what the recorder holds is committed then and the
   // process ends with status 0, whatever the queue is at. A second call does nothing. On the loop's thread, from work
   // or an event of it.
   void endClients(platform::UniqueFunction<void()> clientsAreGone);
+  // Serves until the loop is stopped, then serves the requests that were taken and makes safe what the recorder holds.
   void serve();
 
  private:
   void exitProcess(int status) override;
+  platform::Facilities facilitiesOf();
   plist::Dictionary status();
-  void end();
-  void settleQueues();
   void lookForTheEnd();
   void giveUpClients();
+  void end();
+  void settleQueues();
 
   const std::chrono::milliseconds settleTime_;
+  const std::chrono::milliseconds endTime_;
   const std::string temporaryDirectory_;
   platform::Clock& clock_;
-  const std::chrono::milliseconds endTime_;
   platform::Log& log_;
   ServiceManager& serviceManager_;
   platform::UniqueFunction<void()> settleLog_;
   MainLoop loop_;
   ConnectionHost connections_;
+  const bool recorderEnabled_;  // false: it never starts, and no stand-in is handed out
   recorder::Recorder recorder_;
   LinuxWorkQueues workQueues_;
   LinuxRandomSource randomSource_;
   recorder::RecorderTallyService tally_;
+  NoTallyService noTally_;
   recorder::RecorderWattlogService wattlog_;
   recorder::RecorderPylonService pylon_;
   recorder::RecorderSnareService snare_;
@@ -140,10 +144,10 @@ class LinuxPlatform final : private platform::ProcessControl {
   Watchdog watchdog_;
   SessionCount sessionCount_;
   std::shared_ptr<SocketListener> listener_;
+  platform::UniqueFunction<void()> clientsAreGone_;  // set while the clients' ends are served
+  bool ending_ = false;
+  Deadline endDeadline_;
   const platform::Facilities facilities_;
 };
 
 }  // namespace tarn::linux_host
-  platform::UniqueFunction<void()> clientsAreGone_;  // set while the clients' ends are served
-  bool ending_ = false;
-  Deadline endDeadline_;

@@ -324,6 +324,21 @@ TEST_F(LinuxPlatformTest, HandsOutEverythingThatAMachineHasOnTheConfiguredPaths)
   EXPECT_FALSE(facilities.accessories);
 }
 
+TEST_F(LinuxPlatformTest, WithoutTheRecorderNothingStandsInAndNothingIsWritten) {
+  configuration_.recorderEnabled = false;
+  make();
+  ASSERT_EQ(platform_->start(), "");
+  ASSERT_EQ(listen(), "");
+  const platform::Facilities& facilities = platform_->facilities();
+  EXPECT_FALSE(facilities.wattlog || facilities.pylon || facilities.snare || facilities.tattle || facilities.gyre);
+  EXPECT_FALSE(facilities.rtcReporting);
+  EXPECT_TRUE(facilities.flume && facilities.performanceTrace && facilities.signposts);
+  EXPECT_FALSE(facilities.tally.eventIsInUse("sys.oxbow.tarnkit.Playback.Start"));
+  facilities.tally.sendEventLazy("event", [] { return plist::Dictionary(); });
+  end();
+  EXPECT_FALSE(std::filesystem::exists(folder_.path("recorder.sqlite3")));
+}
+
 TEST_F(LinuxPlatformTest, TemporaryFolderThatCannotBeMadeFailsTheStart) {
   folder_.write("tmp", "in the way");
   EXPECT_EQ(make().start(), folder_.path("tmp") + ": Not a directory");
