@@ -48,12 +48,17 @@ std::optional<Refusal> HostSetup::prepare(const ServiceOptions& options) {
     return Refusal{std::move(error)};
   }
   auto opening = openLog(options.logTarget, options.logLevel, clock);
-  log = std::move(opening.value);
-  return log ? std::nullopt : std::optional<Refusal>(std::in_place, std::move(opening.error->text));
+  if (opening.failed()) {
+    return Refusal{std::move(opening.error->text)};
+  }
+  queuedLog_ = std::move(opening.value);
+  log = std::make_unique<LogFloodGuard>(*queuedLog_, clock);
+  return std::nullopt;
 }
 
 void HostSetup::settleLog() {
-  static_cast<void>(log->settle(kLastWhileOfTheLog));
+  log->tellCounts();
+  static_cast<void>(queuedLog_->settle(kLastWhileOfTheLog));
 }
 
 std::optional<Refusal> HostSetup::readSettings(const ServiceOptions& options) {

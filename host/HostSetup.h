@@ -8,6 +8,7 @@
 #include <optional>
 #include <string>
 
+#include "host/log/LogFloodGuard.h"
 #include "host/log/QueuedLog.h"
 #include "host/loop/SignalSource.h"
 #include "host/machine/LinuxClock.h"
@@ -41,12 +42,14 @@ class HostSetup {
   std::shared_ptr<SignalSource> signals;
   ListenSocket socket;
   LinuxClock clock;
-  std::unique_ptr<QueuedLog> log;
+  // The guard against floods, in front of the queue.
+  std::unique_ptr<LogFloodGuard> log;
 
  private:
   std::optional<Refusal> readSettings(const ServiceOptions& options);
 
   FileLock stateLock_;
+  std::unique_ptr<QueuedLog> queuedLog_;
 };
 
 }  // namespace tarn::linux_host

@@ -6,6 +6,7 @@
 #include <algorithm>
 #include <cerrno>
 
+#include "host/log/LogFloodGuard.h"
 #include "host/log/PrefixedLog.h"
 #include "wire/Encoder.h"
 
@@ -22,19 +23,17 @@ constexpr std::size_t kKeptOutputBytes = 65536;
 }  // namespace
 
 SocketConnection::SocketConnection(ConnectionHost& host, UniqueDescriptor socket, std::uint64_t number)
-    : host_(host), socket_(std::move(socket)), number_(number), frames_(host.limits.maxFrameBytes) {
+    : host_(host), socket_(std::move(socket)), client_{.connection = number}, frames_(host.limits.maxFrameBytes) {
   ucred peer{};
   socklen_t size = sizeof peer;
   if (::getsockopt(socket_.get(), SOL_SOCKET, SO_PEERCRED, &peer, &size) == 0) {
-    processIdentifier_ = peer.pid;
+    client_.process = peer.pid;
+    client_.user = peer.uid;
   }
+  description_ = describe(client_);
 }
 
 SocketConnection::~SocketConnection() = default;
-
-std::string SocketConnection::description() const {
-  return "connection " + std::to_string(number_) + " of process " + std::to_string(processIdentifier_);
-}
 
 void SocketConnection::setExportedObject(std::shared_ptr<platform::TarnReportingServiceProtocol> object) {
   object_ = std::move(object);
@@ -46,8 +45,8 @@ void SocketConnection::resume() {
   }
   state_ = State::Open;
   ++host_.ledger.connectionsOpen;
-  host_.add(*this);
   ++host_.ledger.connectionsTotal;
+  host_.add(*this);
   watch(EPOLLIN);
 }
 
@@ -68,6 +67,7 @@ void SocketConnection::watch(std::uint32_t events) {
 }
 
 void SocketConnection::handleEvents(std::uint32_t events) {
+  const LogClientScope scope(client_);
   if ((events & EPOLLOUT) != 0) {
     flush();
   }
@@ -153,6 +153,7 @@ void SocketConnection::serveRequest(wire::DecodedRequest& request) {
 }
 
 void SocketConnection::goOn() {
+  const LogClientScope scope(client_);
   if (state_ != State::Open || !heldRequest_) {
     return;
   }
@@ -165,7 +166,6 @@ void SocketConnection::goOn() {
   }
 }
 
-bool SocketConnection::takesReplies() noexcept {
 // The socket then yields what came before and its end, in this order.
 void SocketConnection::endInput() {
   if (socket_) {
@@ -173,6 +173,7 @@ void SocketConnection::endInput() {
   }
 }
 
+bool SocketConnection::takesReplies() noexcept {
   if ((state_ == State::Open || state_ == State::Ending) && !outputBroken_) {
     return true;
   }
@@ -213,6 +214,7 @@ void SocketConnection::replyAppended() {
 }
 
 void SocketConnection::flush() {
+  const LogClientScope scope(client_);
   flushAsked_ = false;
   if (!socket_ || !sendSome()) {
     return;
@@ -306,9 +308,9 @@ void SocketConnection::finish(bool interrupted) {
   state_ = State::Ended;
   socket_.reset();
   --host_.ledger.connectionsOpen;
+  host_.remove(*this);
   if (auto handler = std::exchange(interruptionHandler_, {}); handler && interrupted) {
     handler();
-  host_.remove(*this);
   }
   if (auto handler = std::exchange(invalidationHandler_, {})) {
     handler();

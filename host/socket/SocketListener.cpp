@@ -84,12 +84,13 @@ void SocketListener::take(UniqueDescriptor client) {
   if (std::exchange(shortage_, false)) {
     logPrefixed(host_.log, kHostCategory, platform::LogLevel::Default, kModule, "accepting clients again");
   }
+  const auto connection = std::make_shared<SocketConnection>(host_, std::move(client), nextNumber_++);
+  const LogClientScope scope(connection->client());
   const auto delegate = delegate_.lock();
-  if (delegate == nullptr) {
-    return;
+  if (delegate == nullptr || !delegate->listenerShouldAcceptNewConnection(connection)) {
+    logPrefixed(host_.log, kConnectionCategory, platform::LogLevel::Error, kModule,
+                "refused " + connection->description() + ": the service takes no client now");
   }
-  delegate->listenerShouldAcceptNewConnection(
-      std::make_shared<SocketConnection>(host_, std::move(client), nextNumber_++));
 }
 
 }  // namespace tarn::linux_host
