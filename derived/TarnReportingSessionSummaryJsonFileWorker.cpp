@@ -1,6 +1,5 @@
 #include "derived/TarnReportingSessionSummaryJsonFileWorker.h"
 
-#include <algorithm>
 #include <cstdint>
 #include <mutex>
 #include <unordered_map>
@@ -11,6 +10,7 @@
 #include "platform/LocalCalendar.h"
 #include "plist/EscapedText.h"
 #include "plist/formats/Json.h"
+#include "service/vocabulary/FileNameText.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
 #include "service/vocabulary/TarnReportingUtility.h"
@@ -32,11 +32,7 @@ using Counts = std::unordered_map<std::string, std::uint64_t>;
 // The file's path without ".json".
 std::string pathStem(const std::string& directory, const TarnReportingSession& session) {
   const platform::Facilities& facilities = TarnReportingFacilities();
-  std::string application = TarnReportingUtilityRetrieveAppName(session.configuration());
-  // What no file name can hold.
-  std::replace_if(
-      application.begin(), application.end(), [](char character) { return character == '/' || character == '\0'; },
-      '_');
+  const std::string application = fileNameText(TarnReportingUtilityRetrieveAppName(session.configuration()));
   std::string stem = directory + "/";
   stem += facilities.localCalendar.format(facilities.clock.epochSeconds(), "yyyyMMdd-HHmmssZ");
   stem += "-" + std::to_string(session.reporterID()) + "-" + application + "-";
