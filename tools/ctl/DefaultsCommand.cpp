@@ -1,6 +1,7 @@
 #include <unistd.h>
 
 #include <CLI/CLI.hpp>
+#include <algorithm>
 #include <memory>
 
 #include "host/settings/JsonDefaultsStore.h"
@@ -46,7 +47,11 @@ int print(const plist::ValueView& value, JsonLayout layout) {
     text->pop_back();
   }
   Output output(STDOUT_FILENO);
-  output.line(*text);
+  for (std::string_view rest = *text; !rest.empty();) {
+    const std::size_t end = std::min(rest.find('\n'), rest.size());
+    output.line(rest.substr(0, end));
+    rest.remove_prefix(std::min(end + 1, rest.size()));
+  }
   return output.status();
 }
 
@@ -57,7 +62,7 @@ int read(const Context& context, const Arguments& arguments) {
   Defaults defaults(context);
   const JsonDefaultsStore::Suite suite = defaults->suite(arguments.suite);
   if (!suite.fault.empty()) {
-    complain(printable(suite.fault));
+    complain(suite.fault);
     return kBadInput;
   }
   if (arguments.wholeSuite) {
@@ -65,7 +70,7 @@ int read(const Context& context, const Arguments& arguments) {
   }
   const plist::ValueView value = suite.values.get(arguments.key);
   if (!value.present()) {
-    complain("there is no key \"" + printable(arguments.key) + "\" in " + printable(arguments.suite));
+    complain("there is no key \"" + arguments.key + "\" in " + arguments.suite);
     return kFailure;
   }
   return print(value, JsonLayout::OneLine);
@@ -82,7 +87,7 @@ int store(const Context& context, const Arguments& arguments, const plist::Value
   if (fault.empty()) {
     return kSuccess;
   }
-  complain(printable(fault));
+  complain(fault);
   return isBroken ? kBadInput : kFailure;
 }
 

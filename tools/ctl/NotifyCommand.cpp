@@ -40,7 +40,7 @@ int notify(const Context& context, const Arguments& arguments) {
   if (fault.empty()) {
     return kSuccess;
   }
-  complain(printable(fault));
+  complain(fault);
   return kFailure;
 }
 
