@@ -1,5 +1,9 @@
 #include "host/HostSetup.h"
 
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
 #include <chrono>
 #include <utility>
 
@@ -24,14 +28,21 @@ ListenSocket::Result openSocket(const ServiceOptions& options) {
     return handedOver;
   }
   if (options.socketIsDefault) {
-    makeFolder(options.socketPath->substr(0, options.socketPath->rfind('/')), 0755);  // binding tells when it failed
+    makeFolder(options.socketPath->substr(0, options.socketPath->rfind('/')), 0750);  // binding tells when it failed
   }
   return ListenSocket::claim(*options.socketPath);
+}
+
+// Also when it only can't be told: reading it says what is wrong.
+bool isThere(const std::string& path) {
+  return !path.empty() && (::access(path.c_str(), F_OK) == 0 || (errno != ENOENT && errno != ENOTDIR));
 }
 
 }  // namespace
 
 std::optional<Refusal> HostSetup::prepare(const ServiceOptions& options) {
+  // Whatever a caller's mask lets through: what the service makes is for its user and group alone.
+  ::umask(::umask(0) | S_IWGRP | S_IRWXO);
   if (auto refusal = readSettings(options)) {
     return refusal;
   }
@@ -62,8 +73,9 @@ void HostSetup::settleLog() {
 }
 
 std::optional<Refusal> HostSetup::readSettings(const ServiceOptions& options) {
-  if (options.configurationFile) {
-    ReadConfiguration read = readConfiguration(*options.configurationFile);
+  // One that is named must be there; the installed one may be absent.
+  if (const auto& file = options.configurationFile; file || isThere(options.defaultConfigurationFile)) {
+    ReadConfiguration read = readConfiguration(file.value_or(options.defaultConfigurationFile));
     if (!read.configuration) {
       return Refusal{std::move(read.error), kExitConfiguration};
     }

@@ -141,7 +141,7 @@ bool JsonDefaultsStore::isSettled(const Stamp& stamp) {
 
 // Reads the file and tells which state of it that was.
 JsonDefaultsStore::Suite JsonDefaultsStore::read(const std::string& path, Stamp& stamp) {
-  const UniqueDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
+  const UniqueDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY | O_NOFOLLOW));
   struct stat facts {};
   if (!file) {
     const int error = errno;

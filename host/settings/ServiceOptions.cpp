@@ -52,7 +52,8 @@ void addOptions(CLI::App& app, RawOptions& raw) {
                  "/var/lib/tarnreporting)")
       ->type_name("DIR")
       ->check(checkNotEmpty);
-  app.add_option("--config", raw.configurationFile, "Configuration file, TOML (default: none)")
+  app.add_option("--config", raw.configurationFile,
+                 "Configuration file, TOML (default: the installed tarnreporting/tarnreportingd.toml, if there is one)")
       ->type_name("FILE")
       ->check(checkNotEmpty);
   app.add_option("--device-properties", raw.devicePropertiesFile,
@@ -108,6 +109,7 @@ ServiceCommand parseServiceCommand(int argumentCount, const char* const* argumen
   options.socketIsDefault = raw.socketPath.empty();
   options.stateDirectory = *stateDirectory;
   options.configurationFile = orNothing(raw.configurationFile);
+  options.defaultConfigurationFile = defaultConfigurationFile(environment);
   options.devicePropertiesFile = orNothing(raw.devicePropertiesFile);
   options.logLevel = *logLevelFromName(raw.logLevel);
   options.logTarget = raw.logTarget;
