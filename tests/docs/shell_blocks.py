@@ -79,7 +79,7 @@ def prepare(folder, build):
         with open(os.path.join(folder, path), "w", encoding="utf-8") as file:
             file.write(content)
         os.chmod(os.path.join(folder, path), 0o755)
-    environment = {**os.environ, "TARNREPORTING_SOCKET": folder + "/socket", "HOME": folder,
+    environment = {**os.environ, "TARNREPORTING_SOCKET": folder + "/socket", "HOME": folder, "TMPDIR": folder,
                    "XDG_STATE_HOME": folder + "/home", "PATH": folder + "/bin:" + os.environ["PATH"]}
     service = subprocess.Popen([build + "/bin/tarnreportingd", "--socket", folder + "/socket", "--state-dir", folder],
                                stdin=subprocess.DEVNULL, stderr=subprocess.DEVNULL)

@@ -171,7 +171,7 @@ class StagedPackage(unittest.TestCase):
             def hand_over():  # as the service manager does
                 os.dup2(listener.fileno(), 3)
 
-            service = subprocess.Popen(["sh", "-c", 'LISTEN_FDS=1 LISTEN_PID=$$ exec "$@"', "sh", *words],
+            service = subprocess.Popen(["sh", "-c", 'export LISTEN_FDS=1 LISTEN_PID=$$; exec "$@"', "sh", *words],
                                        stdin=subprocess.DEVNULL, stderr=subprocess.PIPE, text=True,
                                        preexec_fn=hand_over, pass_fds=(3,))
         try:
