@@ -23,7 +23,7 @@ void ServerQueue::async(platform::Work work) {
   bool wakeServer = false;
   {
     const MutexLock lock(mutex_);
-    incoming_.push_back(std::move(work));
+    incoming_.push_back({std::move(work), LogClientScope::current()});
     ready_.fetch_add(1, std::memory_order_relaxed);
     wakeServer = mustWake();
   }
@@ -41,7 +41,7 @@ void ServerQueue::asyncAfter(std::chrono::nanoseconds delay, platform::Work work
   bool wakeServer = false;
   {
     const MutexLock lock(mutex_);
-    delayed_.add(deadline, std::move(work));
+    delayed_.add(deadline, {std::move(work), {}});
     wakeServer = deadline < sleepsUntil_ && mustWake();
   }
   if (wakeServer) {
@@ -74,10 +74,11 @@ std::size_t ServerQueue::run(std::size_t limit) {
   const CurrentQueue current(this);
   std::size_t count = 0;
   while (count < limit && (next_ < batch_.size() || refill())) {
-    platform::Work work = std::move(batch_[next_++]);
+    Piece piece = std::move(batch_[next_++]);
     ready_.fetch_sub(1, std::memory_order_relaxed);
     progress_.step();
-    work();
+    const LogClientScope scope(piece.client);
+    piece.work();
     ++count;
   }
   return count;
@@ -87,7 +88,7 @@ bool ServerQueue::refill() {
   batch_.clear();
   next_ = 0;
   if (batch_.capacity() > kKeptPieces) {
-    batch_ = std::vector<platform::Work>();
+    batch_ = std::vector<Piece>();
   }
   const MutexLock lock(mutex_);
   if (!delayed_.empty()) {

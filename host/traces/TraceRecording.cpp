@@ -6,7 +6,7 @@
 #include <cmath>
 #include <utility>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 #include "plist/CalendarDate.h"
 
 namespace tarn::linux_host {
@@ -110,8 +110,8 @@ void TraceRecording::drain() {
   failure_ = file_->flush();
   if (failure_.failed()) {
     endRecording();
-    hostLog(parts_.log, kTraceCategory, LogLevel::Error, kModule,
-            "performance trace " + token_ + " can't be written and ends here: " + failure_->text);
+    logPrefixed(parts_.log, kTraceCategory, LogLevel::Error, kModule,
+                "performance trace " + token_ + " can't be written and ends here: " + failure_->text);
   }
 }
 
@@ -166,9 +166,9 @@ void TraceRecording::sampleLoad() {
 
 void TraceRecording::logLeftOut() const {
   if (file_->leftOut() == 0) return;
-  hostLog(parts_.log, kTraceCategory, LogLevel::Error, kModule,
-          "performance trace " + token_ + " left out " + std::to_string(file_->leftOut()) +
-              " events: " + (file_->isFull() ? "its file is full" : "they came faster than they could be written"));
+  logPrefixed(parts_.log, kTraceCategory, LogLevel::Error, kModule,
+              "performance trace " + token_ + " left out " + std::to_string(file_->leftOut()) +
+                  " events: " + (file_->isFull() ? "its file is full" : "they came faster than they could be written"));
 }
 
 // Without the lock while it runs: a callback may take the delegate away or let go of the session.

@@ -1,11 +1,11 @@
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 
 #include "platform/LogPrefix.h"
 
 namespace tarn::linux_host {
 
-void hostLog(platform::Log& log, const platform::LogCategory& category, platform::LogLevel level,
-             std::string_view module, std::string_view text, int line) {
+void logPrefixed(platform::Log& log, const platform::LogCategory& category, platform::LogLevel level,
+                 std::string_view module, std::string_view text, int line) {
   if (level < log.threshold()) return;
   log.write({category, level, module, line, prefixed(module, text, line)});
 }

@@ -1,5 +1,5 @@
-// hostLog: the log lines of the host's own parts (loop, listener, connections), in the form of all others: the prefix
-// "%25s:%-5d " (module, line), then the text. Threads: any.
+// logPrefixed: the log lines of the host's own parts (loop, listener, connections) in the form of all others: the text
+// stands behind the prefix "%25s:%-5d " (module, line). Threads: any.
 #pragma once
 
 #include <string>
@@ -19,8 +19,8 @@ inline constexpr platform::LogCategory kDriverCategory{"sys.oxbow.tarnkit", "tar
 // The performance traces and their analysis.
 inline constexpr platform::LogCategory kTraceCategory{"sys.oxbow.tarnkit", "tarnrt"};
 
-void hostLog(platform::Log& log, const platform::LogCategory& category, platform::LogLevel level,
-             std::string_view module, std::string_view text, int line = __builtin_LINE());
+void logPrefixed(platform::Log& log, const platform::LogCategory& category, platform::LogLevel level,
+                 std::string_view module, std::string_view text, int line = __builtin_LINE());
 
 // The text with the prefix of its module and line, as every line has it.
 std::string prefixed(std::string_view module, std::string_view text, int line = __builtin_LINE());

@@ -1,4 +1,4 @@
-#include "host/log/FileLog.h"
+#include "host/log/FileOutput.h"
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -9,20 +9,23 @@
 
 namespace tarn::linux_host {
 
-FileLog::FileLog(std::string path, const platform::Clock& clock, platform::LogLevel threshold)
-    : LineLog(clock, threshold), path_(std::move(path)) {}
+FileOutput::FileOutput(std::string path) : path_(std::move(path)) {}
 
-Status FileLog::open() {
-  UniqueDescriptor opened(::open(path_.c_str(), O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC | O_NOCTTY, 0640));
+Status FileOutput::open() {
+  // What isn't a file (a pipe, a terminal) holds nobody up either.
+  UniqueDescriptor opened(
+      ::open(path_.c_str(), O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC | O_NOCTTY | O_NONBLOCK, 0640));
   struct stat facts {};
   if (!opened || ::fstat(opened.get(), &facts) != 0) return lastSystemError();
   file_ = std::move(opened);
   device_ = facts.st_dev;
   inode_ = facts.st_ino;
+  setMayStall(!S_ISREG(facts.st_mode));
+  beginAnew();
   return {};
 }
 
-int FileLog::descriptor() {
+int FileOutput::descriptor() {
   struct stat facts {};
   const bool same = file_ && ::stat(path_.c_str(), &facts) == 0 && facts.st_dev == device_ && facts.st_ino == inode_;
   if (same) return file_.get();
