@@ -61,7 +61,7 @@ TEST_F(HostSetupTest, WhatIsMadeIsForUserAndGroupAlone) {
   const int status = testing::inChild([&] {
     ::umask(0);
     HostSetup setup;
-    if (setup.prepare(options())) return 1;
+    if (setup.prepare(options()).failed()) return 1;
     std::filesystem::create_directory(folder_.path("made"));
     return ::umask(0) == 027 ? 0 : 2;
   });
@@ -74,7 +74,7 @@ TEST_F(HostSetupTest, ATighterMaskOfTheCallerStays) {
   EXPECT_EQ(testing::inChild([&] {
               ::umask(077);
               HostSetup setup;
-              return setup.prepare(options()) || ::umask(0) != 077 ? 1 : 0;
+              return setup.prepare(options()).failed() || ::umask(0) != 077 ? 1 : 0;
             }),
             0);
 }

@@ -237,7 +237,7 @@ TEST_F(LinuxPlatformTest, WorkThatABackEndKeepsWaitingIsLeftUndoneAndTold) {
 
 TEST_F(LinuxPlatformTest, EndInOrderServesWhatClientsSentAndThenTheirEnds) {
   make();
-  ASSERT_EQ(platform_->start(), "");
+  ASSERT_EQ(platform_->start().text(), "");
   ASSERT_EQ(listen(), "");
   TestClient first(socket());
   TestClient second(socket());
@@ -274,7 +274,7 @@ TEST_F(LinuxPlatformTest, EndInOrderEndsHeldConnectionsOnceTheyMayGoOn) {
   ASSERT_TRUE(client.request(2, messageRequest({{"a", 2}})));
   auto& queue = *platform_->loop().queue();
   queue.asyncAfter(50ms, [this] { platform_->endClients([] {}); });
-  queue.asyncAfter(100ms, [this] { EXPECT_EQ(platform_->start(), ""); });
+  queue.asyncAfter(100ms, [this] { EXPECT_EQ(platform_->start().text(), ""); });
   platform_->serve();
   EXPECT_TRUE(client.reply());
   EXPECT_TRUE(client.reply());
@@ -286,7 +286,7 @@ TEST_F(LinuxPlatformTest, EndInOrderThatGetsStuckCommitsAndExitsInTime) {
   const auto begin = std::chrono::steady_clock::now();
   const int status = testing::inChild([this] {
     make();
-    if (!platform_->start().empty() || !listen().empty()) return 1;
+    if (platform_->start().failed() || !listen().empty()) return 1;
     platform_->loop().queue()->async([this] { platform_->endClients([] {}); });
     platform_->loop().queue()->async([this] {
       record("event");
@@ -330,7 +330,7 @@ TEST_F(LinuxPlatformTest, HandsOutEverythingThatAMachineHasOnTheConfiguredPaths)
 TEST_F(LinuxPlatformTest, WithoutTheRecorderNothingStandsInAndNothingIsWritten) {
   configuration_.recorderEnabled = false;
   make();
-  ASSERT_EQ(platform_->start(), "");
+  ASSERT_EQ(platform_->start().text(), "");
   ASSERT_EQ(listen(), "");
   const platform::Facilities& facilities = platform_->facilities();
   EXPECT_FALSE(facilities.wattlog || facilities.pylon || facilities.snare || facilities.tattle || facilities.gyre);

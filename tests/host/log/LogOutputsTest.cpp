@@ -29,13 +29,13 @@ class FileOutputTest : public LogFixture {
 
 TEST_F(FileOutputTest, IsAppendedTo) {
   folder_.write("log", "before\n");
-  ASSERT_FALSE(output_.open());
+  ASSERT_TRUE(output_.open().ok());
   EXPECT_EQ(output_.write(output_.formed(5, entry("one"))), 0);
   EXPECT_EQ(folder_.read("log"), "before\n" + line("one"));
 }
 
 TEST_F(FileOutputTest, ThatWasRenamedIsBegunAnew) {
-  ASSERT_FALSE(output_.open());
+  ASSERT_TRUE(output_.open().ok());
   EXPECT_EQ(output_.write("one\n"), 0);
   std::filesystem::rename(folder_.path("log"), folder_.path("log.1"));
   EXPECT_EQ(output_.write("two\n"), 0);
@@ -44,7 +44,7 @@ TEST_F(FileOutputTest, ThatWasRenamedIsBegunAnew) {
 }
 
 TEST_F(FileOutputTest, ThatWasRemovedIsBegunAnew) {
-  ASSERT_FALSE(output_.open());
+  ASSERT_TRUE(output_.open().ok());
   EXPECT_EQ(output_.write("one\n"), 0);
   std::filesystem::remove(folder_.path("log"));
   EXPECT_EQ(output_.write("two\n"), 0);
@@ -54,7 +54,7 @@ TEST_F(FileOutputTest, ThatWasRemovedIsBegunAnew) {
 TEST_F(FileOutputTest, ThatWasRenamedAndCannotBeBegunAnewTakesTheLines) {
   std::filesystem::create_directory(folder_.path("logs"));
   FileOutput output(folder_.path("logs/log"));
-  ASSERT_FALSE(output.open());
+  ASSERT_TRUE(output.open().ok());
   std::filesystem::rename(folder_.path("logs"), folder_.path("old"));
   EXPECT_EQ(output.write("one\n"), 0);
   EXPECT_EQ(output.write("two\n"), 0);
@@ -63,12 +63,12 @@ TEST_F(FileOutputTest, ThatWasRenamedAndCannotBeBegunAnewTakesTheLines) {
 
 TEST_F(FileOutputTest, OnAFullDiskSaysSo) {
   std::filesystem::create_symlink("/dev/full", folder_.path("log"));
-  ASSERT_FALSE(output_.open());
+  ASSERT_TRUE(output_.open().ok());
   EXPECT_EQ(output_.write("one\n"), ENOSPC);
 }
 
 TEST_F(FileOutputTest, LineThatWasCutOffIsCarriedOnWhereItStopped) {
-  ASSERT_FALSE(output_.open());
+  ASSERT_TRUE(output_.open().ok());
   rlimit before{};
   ASSERT_EQ(::getrlimit(RLIMIT_FSIZE, &before), 0);
   const auto handler = std::signal(SIGXFSZ, SIG_IGN);
@@ -86,7 +86,7 @@ TEST_F(FileOutputTest, LineThatWasCutOffIsCarriedOnWhereItStopped) {
 TEST_F(FileOutputTest, PipeThatNobodyReadsIsRefusedAtOnce) {
   ASSERT_EQ(::mkfifo(folder_.path("log").c_str(), 0600), 0);
   const auto error = output_.open();
-  ASSERT_TRUE(error);
+  ASSERT_TRUE(error.failed());
   EXPECT_EQ(error->code, ENXIO);
 }
 
@@ -138,7 +138,7 @@ class JournalOutputTest : public LogFixture {
 };
 
 TEST_F(JournalOutputTest, EntryBecomesFields) {
-  ASSERT_FALSE(output_.open());
+  ASSERT_TRUE(output_.open().ok());
   EXPECT_EQ(output_.write(output_.formed(
                 5, {kTestCategory, LogLevel::Error, "Session", 42, "                  Session:42    one"})),
             0);
@@ -171,7 +171,7 @@ TEST_F(JournalOutputTest, LevelsBecomePriorities) {
 }
 
 TEST_F(JournalOutputTest, ThatNobodyReadsTakesNoMoreAndDoesNotWait) {
-  ASSERT_FALSE(output_.open());
+  ASSERT_TRUE(output_.open().ok());
   int error = 0;
   for (int count = 0; count < 100'000 && error == 0; ++count) {
     error = output_.write("MESSAGE=text\n");
@@ -182,7 +182,7 @@ TEST_F(JournalOutputTest, ThatNobodyReadsTakesNoMoreAndDoesNotWait) {
 }
 
 TEST_F(JournalOutputTest, ThatWasStartedAnewIsFoundAgain) {
-  ASSERT_FALSE(output_.open());
+  ASSERT_TRUE(output_.open().ok());
   journal_.reset();
   EXPECT_EQ(output_.write("MESSAGE=one\n"), ECONNREFUSED);
   std::filesystem::remove(path_);
@@ -195,7 +195,7 @@ TEST_F(JournalOutputTest, ThatWasStartedAnewIsFoundAgain) {
 TEST_F(JournalOutputTest, AbsentOneIsToldWithItsPath) {
   JournalOutput absent(folder_.path("none"));
   const auto error = absent.open();
-  ASSERT_TRUE(error);
+  ASSERT_TRUE(error.failed());
   EXPECT_EQ(error->text, folder_.path("none") + ": No such file or directory");
 }
 

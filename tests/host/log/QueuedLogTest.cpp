@@ -33,7 +33,7 @@ class QueuedLogTest : public LogFixture {
   // A log to the file "log" of the folder.
   std::unique_ptr<QueuedLog> toFile(std::size_t mostBytes = QueuedLog::kMostBytes) {
     auto output = std::make_unique<FileOutput>(folder_.path("log"));
-    EXPECT_FALSE(output->open());
+    EXPECT_TRUE(output->open().ok());
     auto log = std::make_unique<QueuedLog>(std::move(output), clock_, LogLevel::Default, mostBytes);
     log->start();
     return log;
@@ -135,7 +135,7 @@ TEST_F(QueuedLogTest, JournalThatNobodyReadsHoldsNobodyUpAndGetsTheLinesLater) {
   const UniqueDescriptor journal(::socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
   ASSERT_EQ(::bind(journal.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
   auto output = std::make_unique<JournalOutput>(path);
-  ASSERT_FALSE(output->open());
+  ASSERT_TRUE(output->open().ok());
   QueuedLog log(std::move(output), clock_, LogLevel::Default, std::size_t{64} << 20);
   log.start();
   constexpr int kLines = 2000;  // more than a socket's queue takes

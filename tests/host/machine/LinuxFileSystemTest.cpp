@@ -115,7 +115,7 @@ TEST_F(LinuxFileSystemTest, ALinkIsNeitherWrittenThroughNorMadeOver) {
   ASSERT_TRUE(opened.failed());
   EXPECT_EQ(opened.error->code, ELOOP);
   const auto made = files_.createFile(path("link"));
-  ASSERT_TRUE(made);
+  ASSERT_TRUE(made.failed());
   EXPECT_EQ(made->code, EEXIST);
   EXPECT_EQ(content("target"), "untouched");
 }
