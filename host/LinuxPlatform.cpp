@@ -163,8 +163,11 @@ void LinuxPlatform::endClients(platform::UniqueFunction<void()> clientsAreGone) 
 // Once a turn: when the last client's end was served, the loop may stop.
 void LinuxPlatform::lookForTheEnd() {
   if (!clientsAreGone_ || connections_.ledger.connectionsOpen != 0 || loop_.queue()->ready() != 0) return;
-  std::exchange(clientsAreGone_, {})();
-  loop_.stop();
+  // As work of the queue, which is where sessions are stopped.
+  loop_.queue()->async([this, gone = std::exchange(clientsAreGone_, {})]() mutable {
+    gone();
+    loop_.stop();
+  });
 }
 
 // On a thread of its own, while the loop's may be stuck in somebody's work: only what any thread may do.
