@@ -121,7 +121,7 @@ TEST_F(RecorderTest, AGroupIsNotHeldBackByEventsThatKeepComing) {
 }
 
 TEST_F(RecorderTest, EventsCloseTogetherShareACommit) {
-  options_.quietTime = options_.groupTime = std::chrono::seconds(30);
+  gatherForLong();
   start().waitUntilOpened();
   recordMany(100);
   EXPECT_EQ(recorder_->counters().waiting, 100U);
@@ -132,7 +132,7 @@ TEST_F(RecorderTest, EventsCloseTogetherShareACommit) {
 }
 
 TEST_F(RecorderTest, ALargeGroupIsWrittenAtOnce) {
-  options_.quietTime = options_.groupTime = std::chrono::seconds(30);
+  gatherForLong();
   options_.groupEvents = 50;
   start().waitUntilOpened();
   recordMany(50);
@@ -140,7 +140,7 @@ TEST_F(RecorderTest, ALargeGroupIsWrittenAtOnce) {
 }
 
 TEST_F(RecorderTest, AGroupOfManyBytesIsWrittenAtOnce) {
-  options_.quietTime = options_.groupTime = std::chrono::seconds(30);
+  gatherForLong();
   options_.groupBytes = 100'000;
   start().waitUntilOpened();
   recordMany(11, 10'000);
@@ -193,7 +193,7 @@ TEST_F(RecorderSettle, AnswersAtOnceWhenNothingWaits) {
 }
 
 TEST_F(RecorderSettle, DoesNotWaitForCompany) {
-  options_.quietTime = options_.groupTime = std::chrono::seconds(30);
+  gatherForLong();
   start().waitUntilOpened();
   record("alone");
   settle("alone");
@@ -215,7 +215,7 @@ TEST_F(RecorderSettle, IsDestroyedUncalledWhenEventsAreGivenUp) {
 }
 
 TEST_F(RecorderTest, ShutdownCommitsWhatWaits) {
-  options_.quietTime = options_.groupTime = std::chrono::seconds(30);
+  gatherForLong();
   start();
   recordMany(500);
   recorder_->shutdown();
@@ -245,7 +245,7 @@ TEST_F(RecorderTest, IdsGoOnInTheNextRun) {
 }
 
 TEST_F(RecorderTest, IsFullFromTheHighMarkUntilTheLowMark) {
-  options_.quietTime = options_.groupTime = std::chrono::seconds(30);
+  gatherForLong();
   options_.highWaterEvents = 10;
   options_.lowWaterEvents = 5;
   recorder_ = std::make_unique<Recorder>(options_, log_, clock_);
@@ -267,7 +267,7 @@ TEST_F(RecorderTest, IsFullFromTheHighMarkUntilTheLowMark) {
 }
 
 TEST_F(RecorderTest, BytesFillItToo) {
-  options_.quietTime = options_.groupTime = std::chrono::seconds(30);
+  gatherForLong();
   options_.highWaterBytes = 100'000;
   options_.lowWaterBytes = 50'000;
   start();
