@@ -26,8 +26,12 @@ HostLimits withinTheSystem(HostLimits limits) {
   return limits;
 }
 
-recorder::RecorderOptions inFolder(recorder::RecorderOptions options, const std::string& stateDirectory) {
+// Under the recorder's cap stands all that the service writes without end.
+recorder::RecorderOptions recorderOptions(const HostConfiguration& configuration, const std::string& stateDirectory) {
+  recorder::RecorderOptions options = configuration.recorder;
   options.file = stateDirectory + "/recorder.sqlite3";
+  const std::string logs = configuration.paths.diagnosticLogs.value_or(stateDirectory) + "/DiagnosticLogs/Audio/";
+  options.folders = {logs + "Reporting", logs + "Traces"};
   return options;
 }
 
@@ -55,7 +59,7 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
       loop_(clock_),
       connections_(loop_, log_, withinTheSystem(configuration.limits)),
       recorderEnabled_(configuration.recorderEnabled),
-      recorder_(inFolder(configuration.recorder, stateDirectory), log_, clock_),
+      recorder_(recorderOptions(configuration, stateDirectory), log_, clock_),
       workQueues_(clock_, loop_.queue(), configuration.limits.poolWork),
       tally_(recorder_, clock_, configuration.tally.inUse),
       wattlog_(recorder_, clock_),
@@ -201,9 +205,9 @@ void LinuxPlatform::exitProcess(int status) {
 
 plist::Dictionary LinuxPlatform::status() {
   const recorder::RecorderCounters counters = recorder_.counters();
-  return connections_.ledger.status(
-      sessionCount_(), loop_.queue()->waiting() + workQueues_.unfinished(),
-      {counters.handedOver, counters.committed, counters.waiting, counters.expired, counters.failed});
+  return connections_.ledger.status(sessionCount_(), loop_.queue()->waiting() + workQueues_.unfinished(),
+                                    {counters.handedOver, counters.committed, counters.waiting, counters.expired,
+                                     counters.failed, counters.lostBefore});
 }
 
 // Takes no more, and makes safe what was taken.

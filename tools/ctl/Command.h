@@ -29,5 +29,6 @@ void addNotifyCommand(CLI::App& app, Context& context);
 void addReportersCommand(CLI::App& app, Context& context);
 void addKillCommand(CLI::App& app, Context& context);
 void addStatusCommand(CLI::App& app, Context& context);
+void addCheckCommand(CLI::App& app, Context& context);
 
 }  // namespace tarn::ctl

@@ -64,6 +64,7 @@ void describe(CLI::App& app, Context& context, Options& options) {
   addReportersCommand(app, context);
   addKillCommand(app, context);
   addStatusCommand(app, context);
+  addCheckCommand(app, context);
 }
 
 // The words of the command line, last one first. A value of --wait stands behind a sign alone: what follows it is the
