@@ -76,13 +76,26 @@ RecorderCounters Recorder::counters() const {
 bool Recorder::flush(std::chrono::milliseconds timeout) {
   const platform::MutexLock lock(mutex_);
   const std::uint64_t target = handedOver_;
-  ++flushers_;
+  awaited_ = target;
   work_.notifyOne();
   // Events are committed in their order, so the count alone tells.
   const bool done =
       done_.waitFor(mutex_, timeout, [&]() TARN_REQUIRES(mutex_) { return committed_ + failed_ >= target; });
-  --flushers_;
   return done && failed_ == 0;
+}
+
+void Recorder::settle(std::shared_ptr<platform::WorkQueue> queue, platform::Work done) {
+  {
+    const platform::MutexLock lock(mutex_);
+    if (failed_ > 0) return;  // nothing will be whole again
+    if (committed_ != handedOver_) {
+      awaited_ = handedOver_;
+      settling_.push_back({handedOver_, std::move(queue), std::move(done)});
+      work_.notifyOne();
+      return;
+    }
+  }
+  queue->async(std::move(done));
 }
 
 void Recorder::run() {
@@ -122,7 +135,7 @@ void Recorder::waitForWork() {
 // Company for a commit comes cheap, as long as it doesn't keep the first event waiting.
 void Recorder::gather() {
   const TimePoint latest = incomingSince_ + options_.groupTime;
-  while (!stopping_ && flushers_ == 0 && incoming_.size() < options_.groupEvents &&
+  while (!stopping_ && !isAwaited() && incoming_.size() < options_.groupEvents &&
          incoming_.bytes() < options_.groupBytes) {
     const TimePoint now = SteadyClock::now();
     if (now >= latest) return;
@@ -182,6 +195,7 @@ void Recorder::account(std::size_t events, std::size_t bytes) {
   waitingBytes_ -= bytes;
   expired_ = writer_.expired();
   done_.notifyAll();
+  answerSettled();
   const bool hasRoom = full_.load(std::memory_order_relaxed) &&
                        handedOver_ - committed_ - failed_ <= options_.lowWaterEvents &&
                        waitingBytes_ <= options_.lowWaterBytes;
@@ -195,7 +209,20 @@ void Recorder::account(std::size_t events, std::size_t bytes) {
   }
 }
 
+// Called locked, and returns so; queues are called without the lock.
+void Recorder::answerSettled() {
+  while (!settling_.empty() && settling_.front().handedOver <= committed_) {
+    Settling settled = std::move(settling_.front());
+    settling_.pop_front();
+    mutex_.unlock();
+    settled.queue->async(std::move(settled.done));
+    mutex_.lock();
+  }
+}
+
 void Recorder::giveUp() {
+  std::deque<Settling> unanswered;
+  unanswered.swap(settling_);
   const std::uint64_t lost = handedOver_ - committed_ - failed_;
   failed_ += lost;
   waitingBytes_ = 0;
@@ -203,12 +230,13 @@ void Recorder::giveUp() {
   opened_ = true;
   full_.store(false, std::memory_order_relaxed);
   done_.notifyAll();
+  mutex_.unlock();
+  unanswered.clear();  // each may hold the last of something
   if (lost > 0) {
-    mutex_.unlock();
     log_.error("recorder gives up " + std::to_string(lost) + " events that could not be written to " +
                options_.file.string() + ": " + writer_.problem());
-    mutex_.lock();
   }
+  mutex_.lock();
 }
 
 }  // namespace tarn::recorder

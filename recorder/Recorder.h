@@ -13,6 +13,8 @@
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
+#include <deque>
+#include <memory>
 #include <string_view>
 #include <thread>
 #include <utility>
@@ -21,6 +23,7 @@
 #include "platform/Log.h"
 #include "platform/ThreadSafety.h"
 #include "platform/UniqueFunction.h"
+#include "platform/WorkQueue.h"
 #include "plist/Dictionary.h"
 #include "recorder/EventWriter.h"
 #include "recorder/RecorderOptions.h"
@@ -68,9 +71,20 @@ class Recorder {
   // Commits what was handed over before the call without waiting for company. Whether all of it is committed; false
   // when the time is up or when it was given up. Threads: any but the writer's.
   [[nodiscard]] bool flush(std::chrono::milliseconds timeout);
+  // The same without waiting here: once all that was handed over before the call is committed, `done` becomes work of
+  // the queue (at once when it is committed already), in the order of the calls. Destroyed uncalled when some of it is
+  // given up at a shutdown. Threads: any.
+  void settle(std::shared_ptr<platform::WorkQueue> queue, platform::Work done);
 
  private:
   using TimePoint = std::chrono::steady_clock::time_point;
+
+  // One that waits for a commit.
+  struct Settling {
+    std::uint64_t handedOver;  // committed when so many are
+    std::shared_ptr<platform::WorkQueue> queue;
+    platform::Work done;
+  };
 
   void run();
   void waitForWork() TARN_REQUIRES(mutex_);
@@ -79,8 +93,10 @@ class Recorder {
   bool writeCurrent() TARN_REQUIRES(mutex_);
   bool maintain() TARN_REQUIRES(mutex_);
   void account(std::size_t events, std::size_t bytes) TARN_REQUIRES(mutex_);
+  void answerSettled() TARN_REQUIRES(mutex_);
   void giveUp() TARN_REQUIRES(mutex_);
   bool hasWaiting() const noexcept TARN_REQUIRES(mutex_) { return committed_ + failed_ != handedOver_; }
+  bool isAwaited() const noexcept TARN_REQUIRES(mutex_) { return committed_ < awaited_; }
 
   const RecorderOptions options_;
   RecorderLog log_;
@@ -105,7 +121,8 @@ class Recorder {
   std::uint64_t committed_ TARN_GUARDED_BY(mutex_) = 0;
   std::uint64_t failed_ TARN_GUARDED_BY(mutex_) = 0;
   std::uint64_t expired_ TARN_GUARDED_BY(mutex_) = 0;
-  int flushers_ TARN_GUARDED_BY(mutex_) = 0;
+  std::uint64_t awaited_ TARN_GUARDED_BY(mutex_) = 0;  // handed over before the last flush() or settle()
+  std::deque<Settling> settling_ TARN_GUARDED_BY(mutex_);
   bool asleep_ TARN_GUARDED_BY(mutex_) = false;  // the writer waits for the first event of a group
   bool opened_ TARN_GUARDED_BY(mutex_) = false;
   bool stopping_ TARN_GUARDED_BY(mutex_) = false;
