@@ -109,6 +109,7 @@ void MainLoop::waitUntil(std::chrono::nanoseconds deadline, platform::UniqueFunc
   if (std::exchange(waits_, true)) {
     return;
   }
+  const WorkLane::Scope nobodys(nullptr);  // what comes meanwhile isn't the work of whoever waits
   while (!isOver() && !stopping_.load(std::memory_order_relaxed)) {
     flushAll();
     const auto left = deadline - clock_.monotonic();

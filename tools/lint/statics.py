@@ -18,6 +18,7 @@ EXCEPTIONS = {
     ("plist/KeyList.cpp", "instance"): "one copy of each key list that never changes, likewise",
     ("tools/ctl/EventsCommand.cpp", "stopRequested"): "a signal handler reaches nothing else",
     ("host/loop/CurrentQueue.h", "current_"): "which queue a thread serves belongs to the thread",
+    ("host/loop/WorkLane.h", "current_"): "and so does whose work of it that is",
 }
 
 OTHER = re.compile(r"(?:using|typedef|static_assert|friend|template|concept|namespace|class|struct|union|enum|extern|"
