@@ -103,6 +103,11 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
   recorder_.setRoomHandler([this] { connections_.resumeRequests(); });
   workQueues_.setRoomHandler([this] { connections_.resumeRequests(); });
   connections_.gate.setPauseSource([this] { return recorder_.isFull() || workQueues_.isFull(); });
+  // What was sent may still be on its way through the workers' own queues.
+  connections_.setSettleSource([this](platform::Work done) {
+    workQueues_.afterWhatIsUnfinished(
+        [this, done = std::move(done)]() mutable { recorder_.settle(loop_.queue(), std::move(done)); });
+  });
 }
 
 std::string LinuxPlatform::start() {
@@ -119,12 +124,12 @@ std::string LinuxPlatform::start() {
 }
 
 std::string LinuxPlatform::listen(ListenSocket socket, const std::shared_ptr<platform::ListenerDelegate>& delegate,
-                                  SessionCount sessionCount) {
+                                  ServiceCount serviceCounts) {
   if (std::string error = socket.listen(); !error.empty()) {
     recorder_.shutdown();
     return error;
   }
-  sessionCount_ = std::move(sessionCount);
+  serviceCounts_ = std::move(serviceCounts);
   connections_.setStatusSource([this] { return status(); });
   listener_ = std::make_shared<SocketListener>(connections_, std::move(socket));
   listener_->setDelegate(delegate);
@@ -136,12 +141,14 @@ std::string LinuxPlatform::listen(ListenSocket socket, const std::shared_ptr<pla
 
 void LinuxPlatform::serve() {
   loop_.run();
-  loop_.queue()->run(std::numeric_limits<std::size_t>::max());  // requests that were taken are served
+  loop_.queue()->run(std::numeric_limits<std::size_t>::max());
+  connections_.shares.finishWork();  // requests that were taken are served
   loop_.flushAll();
   end();
 }
 
 void LinuxPlatform::exitProcess(int status) {
+  connections_.gathersReplies = false;
   loop_.flushAll();  // the replies to what came before
   end();
   std::_Exit(status);
@@ -149,9 +156,11 @@ void LinuxPlatform::exitProcess(int status) {
 
 plist::Dictionary LinuxPlatform::status() {
   const recorder::RecorderCounters counters = recorder_.counters();
-  return connections_.ledger.status(
-      sessionCount_(), loop_.queue()->waiting() + workQueues_.unfinished(),
+  plist::Dictionary status = connections_.ledger.status(
+      serviceCounts_(), loop_.queue()->waiting() + workQueues_.unfinished(),
       {counters.handedOver, counters.committed, counters.waiting, counters.expired, counters.failed});
+  status.set("quotas", quotaStatus(connections_.limits.quotas, connections_.shares));
+  return status;
 }
 
 // Takes no more, and makes safe what was taken.

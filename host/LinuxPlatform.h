@@ -57,8 +57,8 @@ namespace tarn::linux_host {
 
 class LinuxPlatform final : private platform::ProcessControl {
  public:
-  // How many sessions there are; asked on the loop's thread.
-  using SessionCount = platform::UniqueFunction<std::size_t()>;
+  // What the service counts; asked on the loop's thread.
+  using ServiceCount = platform::UniqueFunction<ServiceCounts()>;
   // What was there before; all of it outlives the platform.
   struct Ground {
     platform::Clock& clock;
@@ -81,7 +81,7 @@ class LinuxPlatform final : private platform::ProcessControl {
   [[nodiscard]] std::string start();
   // Lets clients connect, once whoever they are handed to is whole. What went wrong, or nothing.
   [[nodiscard]] std::string listen(ListenSocket socket, const std::shared_ptr<platform::ListenerDelegate>& delegate,
-                                   SessionCount sessionCount);
+                                   ServiceCount serviceCounts);
   // Serves until the loop is stopped, then serves the requests that were taken and makes safe what the recorder holds.
   void serve();
 
@@ -126,7 +126,7 @@ class LinuxPlatform final : private platform::ProcessControl {
   LinuxPerfDataWriters perfDataWriters_;
   JsonDeviceProperties deviceProperties_;
   Watchdog watchdog_;
-  SessionCount sessionCount_;
+  ServiceCount serviceCounts_;
   std::shared_ptr<SocketListener> listener_;
   const platform::Facilities facilities_;
 };

@@ -6,6 +6,7 @@
 #include <cerrno>
 
 #include "host/log/HostLog.h"
+#include "host/socket/Quotas.h"
 #include "host/socket/SocketConnection.h"
 
 namespace tarn::linux_host {
@@ -87,8 +88,14 @@ void SocketListener::take(UniqueDescriptor client) {
   if (delegate == nullptr) {
     return;
   }
-  delegate->listenerShouldAcceptNewConnection(
-      std::make_shared<SocketConnection>(host_, std::move(client), nextNumber_++));
+  const auto connection = std::make_shared<SocketConnection>(host_, std::move(client), nextNumber_++);
+  const std::size_t limit = host_.limits.quotas.connectionsPerUser;
+  const std::size_t use = host_.shares.partyOf(connection->user())->connections;
+  if (use < limit) {
+    delegate->listenerShouldAcceptNewConnection(connection);
+  } else if (use < 2 * limit) {
+    connection->refuse(overQuota("connections", use, limit));
+  }  // else it is closed: its user was told on as many connections as it may have
 }
 
 }  // namespace tarn::linux_host
