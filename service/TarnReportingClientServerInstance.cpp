@@ -274,6 +274,11 @@ void TarnReportingClientServerInstance::setSessionIndex(std::shared_ptr<TarnRepo
                                                         std::uint64_t number) {
   index_ = std::move(index);
   number_ = number;
+  // A platform may deliver requests before the service's own work lists the client.
+  sessions_.forEach([this](std::int64_t reporterID, const std::shared_ptr<TarnReportingSession>&) {
+    index_->add(reporterID, number_, *this);
+  });
+  index_->addRunning(static_cast<std::ptrdiff_t>(sessions_.runningCount()));
 }
 
 void TarnReportingClientServerInstance::storeSession(std::int64_t reporterID,

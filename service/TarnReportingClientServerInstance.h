@@ -58,7 +58,7 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
   // Empty while it is not known; set by the service.
   const std::string& clientProcessName() const noexcept { return clientProcessName_; }
   void setClientProcessName(std::string name) { clientProcessName_ = std::move(name); }
-  // What the client's sessions are told to, and the client's number in it; set by the service, before any session.
+  // What the client's sessions are told to, and the client's number in it; set by the service, once.
   void setSessionIndex(std::shared_ptr<TarnReportingSessionIndex> index, std::uint64_t number);
 
  private:

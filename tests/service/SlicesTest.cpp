@@ -192,6 +192,17 @@ TEST_F(Slices, OfManyClientsTheFirstWithSessionsAreListedAndTheRestCounted) {
   EXPECT_EQ(told[33], "default 0 active reporting session(s) ()");
 }
 
+TEST_F(Slices, SessionsThatAreThereBeforeTheirClientIsListedAreFoundLater) {
+  TarnReportingSessionIndex* const index = const_cast<TarnReportingSessionIndex*>(&service_->sessionIndex());
+  const auto early = TarnReportingClientServerInstance::initWithPID(77, std::weak_ptr(service_));
+  early->createReportingSession(500, [](const std::optional<platform::RemoteError>&, bool) {});
+  platform_.runUntilIdle();
+  EXPECT_EQ(service_->findReportingSessionForID(500), nullptr);
+  early->setSessionIndex(std::shared_ptr<TarnReportingSessionIndex>(std::shared_ptr<void>(), index), 900);
+  EXPECT_NE(service_->findReportingSessionForID(500), nullptr);
+  EXPECT_EQ(service_->sessionCount(), 1U);
+}
+
 TEST_F(Slices, ThirtyTwoClientsAreListedAsTheyAre) {
   for (std::int32_t pid = 1000; pid < 1030; ++pid) {
     connect(pid);
