@@ -46,9 +46,7 @@ double residentBytes(pid_t process) {
 double peakResidentBytes() {
   std::ifstream file("/proc/self/status");
   for (std::string line; std::getline(file, line);) {
-    if (line.starts_with("VmHWM:")) {
-      return std::stod(line.substr(sizeof "VmHWM:")) * 1024;
-    }
+    if (line.starts_with("VmHWM:")) return std::stod(line.substr(sizeof "VmHWM:")) * 1024;
   }
   fail("can't read the memory of this process");
 }
@@ -133,9 +131,7 @@ TemporaryDirectory::~TemporaryDirectory() {
 
 std::string diskOf(const std::string& directory) {
   struct stat facts {};
-  if (::stat(directory.c_str(), &facts) != 0) {
-    return "unknown";
-  }
+  if (::stat(directory.c_str(), &facts) != 0) return "unknown";
   const std::string wanted = std::to_string(major(facts.st_dev)) + ":" + std::to_string(minor(facts.st_dev));
   std::ifstream mounts("/proc/self/mountinfo");
   for (std::string line; std::getline(mounts, line);) {

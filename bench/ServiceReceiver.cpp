@@ -23,12 +23,11 @@ ServiceReceiver::ServiceReceiver(const Settings& settings, const ServiceSetup& s
     : service_(settings, setup), request_(makeRequest()) {
   client::Options options;
   options.autoFlushBytes = writes == Writes::OneEach ? 0 : options.autoFlushBytes;
-  client::TarnReportingClient::Connected connected =
-      client::TarnReportingClient::connect(service_.socketPath(), options);
-  if (!connected.client) {
-    fail(connected.error);
+  client::ClientConnection::Connected connected = client::ClientConnection::connect(service_.socketPath(), options);
+  if (connected.failed()) {
+    fail(connected.error->text);
   }
-  client_ = std::move(connected.client);
+  client_ = std::move(connected.value);
   mustBeOk(client_->call(client::createReportingSession(kReporterID)), "creating the session");
   mustBeOk(client_->call(client::setServiceType(kGenericService, kReporterID)), "setting the service type");
   mustBeOk(client_->call(client::setConfiguration({{"HostApplicationDisplayID", "sys.oxbow.music"}}, kReporterID)),
@@ -59,7 +58,9 @@ void ServiceReceiver::stream(std::size_t count, std::size_t outstanding) {
   failures_ = 0;
   const auto handler = [this](client::Reply&& reply) {
     ++replies_;
-    if (!reply.ok()) ++failures_;
+    if (!reply.ok()) {
+      ++failures_;
+    }
   };
   std::size_t sent = 0;
   while (replies_ < count) {

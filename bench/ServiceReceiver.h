@@ -7,7 +7,7 @@
 
 #include "bench/Receiver.h"
 #include "bench/ServiceProcess.h"
-#include "client/TarnReportingClient.h"
+#include "client/ClientConnection.h"
 
 namespace tarn::bench {
 
@@ -30,7 +30,7 @@ class ServiceReceiver final : public Receiver {
   void start();
 
   ServiceProcess service_;
-  std::unique_ptr<client::TarnReportingClient> client_;
+  std::unique_ptr<client::ClientConnection> client_;
   client::Request request_;
   std::uint64_t number_ = 0;
   std::size_t replies_ = 0;

@@ -100,9 +100,7 @@ Record makeOrdinary(std::uint64_t number, double startSeconds) {
     return makeSpatialState(time, number, place == 100 ? kSpatialAccessory : kSpatialization,
                             number / kSongMessages % 2 == 0);
   }
-  if (place % 10 == 5) {
-    return makeInputState(time, number, place > 20 && place < 180);
-  }
+  if (place % 10 == 5) return makeInputState(time, number, place > 20 && place < 180);
   if (place % 20 == 8) {
     return makeRecord(AudioEventCategory::Lagoon, AudioEventType::State, time, number,
                       {{kGroup, place > 40 && place < 150 ? 1 : 0}, {kMembers, 3}, {kToken, "9f2c1d7e"}});

@@ -25,10 +25,14 @@ bool PendingReplies::noteRequest(const wire::Request& request) {
       found->second = {request.serviceType, false};
       return true;
     case wire::Operation::StopReportingSessionForID:
-      if (request.reporterID != 0 && found != sessions_.end()) found->second.started = false;
+      if (request.reporterID != 0 && found != sessions_.end()) {
+        found->second.started = false;
+      }
       return true;
     case wire::Operation::DestroyReportingSession:
-      if (found != sessions_.end()) sessions_.erase(found);
+      if (found != sessions_.end()) {
+        sessions_.erase(found);
+      }
       return true;
     default:
       return false;
@@ -73,9 +77,7 @@ bool PendingReplies::take(std::uint64_t id, bool failed, ReplyHandler& handler) 
     return true;
   }
   const auto reporter = reporterOfHeld_.find(id);
-  if (reporter == reporterOfHeld_.end()) {
-    return false;
-  }
+  if (reporter == reporterOfHeld_.end()) return false;
   const auto held = held_.find({reporter->second, id});
   handler = std::move(held->second);
   held_.erase(held);
@@ -111,9 +113,7 @@ void PendingReplies::cancelStartsBefore(std::int64_t reporterID, std::uint64_t i
 }
 
 bool PendingReplies::takeCancelled(ReplyHandler& handler) {
-  if (cancelled_.empty()) {
-    return false;
-  }
+  if (cancelled_.empty()) return false;
   handler = std::move(cancelled_.front());
   cancelled_.pop_front();
   return true;

@@ -16,8 +16,8 @@ namespace tarn::client {
 
 namespace {
 
-std::string describe(const char* what, const std::string& path, int errorNumber) {
-  return std::string(what) + " " + path + ": " + std::generic_category().message(errorNumber);
+Result<Socket> failed(const char* what, const std::string& path, int errorNumber) {
+  return {{}, Error{errorNumber, std::string(what) + " " + path + ": " + std::generic_category().message(errorNumber)}};
 }
 
 bool wouldWait(int errorNumber) noexcept {
@@ -34,32 +34,22 @@ Socket& Socket::operator=(Socket&& other) noexcept {
   return *this;
 }
 
-Socket Socket::connect(const std::string& path, int& errorNumber, std::string& error) {
+Result<Socket> Socket::connect(const std::string& path) {
   sockaddr_un address{};
   address.sun_family = AF_UNIX;
   if (path.empty() || path.size() >= sizeof address.sun_path) {
-    errorNumber = path.empty() ? ENOENT : ENAMETOOLONG;
-    error = describe("cannot connect to", path, errorNumber);
-    return Socket();
+    return failed("cannot connect to", path, path.empty() ? ENOENT : ENAMETOOLONG);
   }
   std::memcpy(address.sun_path, path.data(), path.size());
   Socket socket(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
-  if (!socket.open()) {
-    errorNumber = errno;
-    error = describe("cannot make a socket for", path, errorNumber);
-    return Socket();
-  }
+  if (!socket.open()) return failed("cannot make a socket for", path, errno);
   const auto* generic = reinterpret_cast<const sockaddr*>(&address);
   int result = 0;
   do {
     result = ::connect(socket.fd(), generic, sizeof address);
   } while (result != 0 && errno == EINTR);
-  if (result != 0) {
-    errorNumber = errno;
-    error = describe("cannot connect to", path, errorNumber);
-    return Socket();
-  }
-  return socket;
+  if (result != 0) return failed("cannot connect to", path, errno);
+  return {std::move(socket), {}};
 }
 
 void Socket::close() noexcept {
@@ -75,9 +65,7 @@ std::ptrdiff_t Socket::sendSome(std::string_view bytes) noexcept {
 
 std::ptrdiff_t Socket::receiveSome(std::span<std::byte> space, bool mayWait) noexcept {
   const ssize_t received = ::recv(fd_, space.data(), space.size(), mayWait ? 0 : MSG_DONTWAIT);
-  if (received > 0) {
-    return received;
-  }
+  if (received > 0) return received;
   return received < 0 && wouldWait(errno) ? 0 : -1;
 }
 

@@ -8,6 +8,8 @@
 #include <string>
 #include <string_view>
 
+#include "plist/Result.h"
+
 namespace tarn::client {
 
 class Socket {
@@ -18,8 +20,8 @@ class Socket {
   Socket& operator=(Socket&& other) noexcept;
   ~Socket() { close(); }
 
-  // Connects to the socket at `path`. On failure the socket isn't open, `errorNumber` and `error` say why.
-  static Socket connect(const std::string& path, int& errorNumber, std::string& error);
+  // Connects to the socket at `path`. An error names it.
+  static Result<Socket> connect(const std::string& path);
 
   int fd() const noexcept { return fd_; }
   bool open() const noexcept { return fd_ >= 0; }

@@ -1,7 +1,7 @@
 // What the producers that walk over a session's log at its stop do alike: walk, and send what came out.
 //
 // A walk is a class with `void take(const plist::Dictionary& payload)`, called for each message in order, and
-// `TarnReportingSessionMessages finish()`, called once behind the last.
+// `TarnReportingSessionMessages finish()`, called once after the last.
 //
 // Threads: the server queue.
 #pragma once
@@ -31,13 +31,9 @@ template <class Derive>
 void TarnReportingSendDerivedMessages(const std::shared_ptr<TarnReportingSession>& session,
                                       const TarnReportingLogger& log, const LogText& sendingText,
                                       const Derive& derive) {
-  if (!session || session->messages().empty()) {
-    return;
-  }
+  if (!session || session->messages().empty()) return;
   const TarnReportingSessionMessages derived = derive(std::as_const(*session));
-  if (derived.empty()) {
-    return;
-  }
+  if (derived.empty()) return;
   log(LogLevel::Default, sendingText, session->reporterID());
   for (const auto& message : derived) {
     session->sendMessage(message);

@@ -1,7 +1,7 @@
 // TarnReportingMessageFields: the few values of a payload that a walk over a session's messages looks at, read once a
 // message, or the running state that such messages are laid over one after the other.
 //
-// `Field` is an enumeration that numbers the values from 0, with `Count` behind the last. The values lie in the payload
+// `Field` is an enumeration that numbers the values from 0, with `Count` after the last. The values lie in the payload
 // (or wherever they were set from), which must stay as it is meanwhile. A payload is never copied: a state of all its
 // keys, merged for every message, would cost more than everything else at a session's stop.
 //

@@ -15,16 +15,12 @@ const plist::Key kMessageCount("msgcnt");
 const plist::Key kTarnReportingMessageIndex("msgidx");
 
 bool TarnReportingNumbersDiffer(const plist::ValueView& first, const plist::ValueView& second) {
-  if (first.isNumber() && second.isNumber()) {
-    return !(first == second);
-  }
+  if (first.isNumber() && second.isNumber()) return !(first == second);
   return first.asDouble() != second.asDouble();
 }
 
 bool TarnReportingTextsDiffer(const plist::ValueView& first, const plist::ValueView& second) {
-  if (first.isText() && second.isText()) {
-    return first.text() != second.text();
-  }
+  if (first.isText() && second.isText()) return first.text() != second.text();
   return first.asText() != second.asText();
 }
 

@@ -187,9 +187,7 @@ bool TarnReportingSessionLagoonMessagesWorker::didBoolChangeInKey(Field key, con
 plist::ValueView TarnReportingSessionLagoonMessagesWorker::coalesceKey(
     Field key, std::initializer_list<const Fields*> sourceDicts) {
   for (const Fields* source : sourceDicts) {
-    if ((*source)[key].present()) {
-      return (*source)[key];
-    }
+    if ((*source)[key].present()) return (*source)[key];
   }
   return {};
 }

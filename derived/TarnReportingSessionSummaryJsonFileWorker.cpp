@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <cstdint>
-#include <mutex>
 #include <unordered_map>
 #include <utility>
 
@@ -45,11 +44,11 @@ std::string pathStem(const std::string& directory, const TarnReportingSession& s
 }
 
 // Makes an empty file under the first name that is free. `path` is the name that was tried last.
-platform::MaybeError createFile(const std::string& stem, std::string& path) {
+Status createFile(const std::string& stem, std::string& path) {
   platform::FileSystem& files = TarnReportingFacilities().fileSystem;
   path = stem + ".json";
-  platform::MaybeError error = files.createFile(path);
-  for (int number = 2; error && number <= kMostFilesOfOneName && files.exists(path); ++number) {
+  Status error = files.createFile(path);
+  for (int number = 2; error.failed() && number <= kMostFilesOfOneName && files.exists(path); ++number) {
     path = stem + "-" + std::to_string(number) + ".json";
     error = files.createFile(path);
   }
@@ -58,7 +57,7 @@ platform::MaybeError createFile(const std::string& stem, std::string& path) {
 
 void markSessionStarted(TarnReportingSessionMessage& message) {
   static const plist::Key kIsSessionStarted("isSessionStarted");
-  const std::lock_guard guard(message);
+  const MutexLock guard(message);
   message.mutableMessage().set(kIsSessionStarted, message.isSessionStarted() ? "YES" : "NO");
 }
 
@@ -83,9 +82,7 @@ bool appendObject(std::string& text, const TarnReportingSessionMessage& message,
 
 std::unique_ptr<TarnReportingSessionSummaryJsonFileWorker> TarnReportingSessionSummaryJsonFileWorker::initWithSession(
     const std::shared_ptr<TarnReportingSession>& session) {
-  if (session->serviceType() != AudioServiceType::Test && !TarnReportingUtilityIsInternalBuild()) {
-    return nullptr;
-  }
+  if (session->serviceType() != AudioServiceType::Test && !TarnReportingUtilityIsInternalBuild()) return nullptr;
   auto worker = std::make_unique<TarnReportingSessionSummaryJsonFileWorker>(session);
   worker->setStarted(true);
   return worker;
@@ -93,9 +90,7 @@ std::unique_ptr<TarnReportingSessionSummaryJsonFileWorker> TarnReportingSessionS
 
 void TarnReportingSessionSummaryJsonFileWorker::stop() {
   const std::shared_ptr<TarnReportingSession> owner = session();
-  if (!owner || owner->messages().empty()) {
-    return;
-  }
+  if (!owner || owner->messages().empty()) return;
   writeMessages(*owner);
   closeFile();
 }
@@ -105,20 +100,12 @@ void TarnReportingSessionSummaryJsonFileWorker::writeMessages(const TarnReportin
   std::string lines;
   bool isFirst = true;
   for (const auto& message : session.messages()) {
-    if (message->isRedundant()) {
-      continue;
-    }
-    if (reportPath_.empty() && !openFile(session)) {
-      return;
-    }
+    if (message->isRedundant()) continue;
+    if (reportPath_.empty() && !openFile(session)) return;
     markSessionStarted(*message);
     lines = isFirst ? "" : ",\n";
-    if (!appendObject(lines, *message, counts)) {
-      continue;
-    }
-    if (!writeLine(lines)) {
-      return;
-    }
+    if (!appendObject(lines, *message, counts)) continue;
+    if (!writeLine(lines)) return;
     isFirst = false;
   }
 }
@@ -126,17 +113,17 @@ void TarnReportingSessionSummaryJsonFileWorker::writeMessages(const TarnReportin
 bool TarnReportingSessionSummaryJsonFileWorker::openFile(const TarnReportingSession& session) {
   platform::FileSystem& files = TarnReportingFacilities().fileSystem;
   const std::string directory = TarnReportingLogsDirectory();
-  if (const auto error = files.createDirectories(directory, kDirectoryPermissions)) {
+  if (const auto error = files.createDirectories(directory, kDirectoryPermissions); error.failed()) {
     kLog(LogLevel::Error, "can't create logging directory at %@: %@", directory, error->text);
   }
   std::string path;
-  platform::MaybeError error = createFile(pathStem(directory, session), path);
-  if (!error) {
+  Status error = createFile(pathStem(directory, session), path);
+  if (error.ok()) {
     auto opened = files.openForWriting(path);
     error = std::move(opened.error);
     reportFileHandle_ = std::move(opened.value);
   }
-  if (error) {
+  if (error.failed()) {
     kLog(LogLevel::Error, "SummaryJsonFileWorker failed to open file. action=open file=%@ error=\"%@\"", path,
          error->text);
     setStarted(false);
@@ -150,23 +137,21 @@ bool TarnReportingSessionSummaryJsonFileWorker::openFile(const TarnReportingSess
 
 bool TarnReportingSessionSummaryJsonFileWorker::writeLine(std::string line) {
   line += '\n';
-  const platform::MaybeError error = reportFileHandle_->write(line);
-  if (error) {
+  const Status error = reportFileHandle_->write(line);
+  if (error.failed()) {
     kLog(LogLevel::Error, "SummaryJsonFileWorker failed to write line. action=writeline file=%@ error=\"%@\"",
          reportPath_, error->text);
   }
-  writeFailed_ = error.has_value();
+  writeFailed_ = error.failed();
   return !writeFailed_;
 }
 
 void TarnReportingSessionSummaryJsonFileWorker::closeFile() {
-  if (!reportFileHandle_) {
-    return;
-  }
+  if (!reportFileHandle_) return;
   if (!writeFailed_) {  // after a gap the rest would be worth nothing
     writeLine("]");
   }
-  if (const auto error = reportFileHandle_->close()) {
+  if (const auto error = reportFileHandle_->close(); error.failed()) {
     kLog(LogLevel::Error, "SummaryJsonFileWorker failed to closed file. action=close file=%@ error=\"%@\"", reportPath_,
          error->text);
   } else {

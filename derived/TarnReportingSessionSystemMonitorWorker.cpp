@@ -1,6 +1,5 @@
 #include "derived/TarnReportingSessionSystemMonitorWorker.h"
 
-#include <mutex>
 #include <utility>
 
 #include "derived/TarnReportingSystemMonitor.h"
@@ -45,14 +44,12 @@ TarnReportingSessionSystemMonitorWorker::~TarnReportingSessionSystemMonitorWorke
 }
 
 bool TarnReportingSessionSystemMonitorWorker::start() {
-  if (!systemMonitorDictionary_) {
-    return true;
-  }
+  if (!systemMonitorDictionary_) return true;
   for (const plist::Key& feature : featureKeys_) {
     plist::Dictionary state;
     {
       // Read and observed in one step, so that no change falls between; sent without the lock.
-      const std::lock_guard guard(*systemMonitorDictionary_);
+      const MutexLock guard(*systemMonitorDictionary_);
       state = systemMonitorDictionary_->state(feature);
       observe(feature);
     }
@@ -82,10 +79,8 @@ void TarnReportingSessionSystemMonitorWorker::handleChange(const plist::Dictiona
 }
 
 void TarnReportingSessionSystemMonitorWorker::stop() {
-  if (!systemMonitorDictionary_) {
-    return;
-  }
-  const std::lock_guard guard(*systemMonitorDictionary_);
+  if (!systemMonitorDictionary_) return;
+  const MutexLock guard(*systemMonitorDictionary_);
   for (const auto observer : std::exchange(observers_, {})) {
     systemMonitorDictionary_->removeObserver(observer);
   }

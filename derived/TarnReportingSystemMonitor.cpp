@@ -1,13 +1,13 @@
 #include "derived/TarnReportingSystemMonitor.h"
 
 #include <array>
-#include <mutex>
 #include <utility>
 
 #include "platform/Clock.h"
 #include "platform/DefaultsStore.h"
 #include "platform/Facilities.h"
 #include "platform/NotificationCenter.h"
+#include "plist/ThreadSafety.h"
 #include "plist/Value.h"
 #include "service/vocabulary/ProcessState.h"
 #include "service/vocabulary/TarnReportingLog.h"
@@ -49,20 +49,20 @@ struct Shared {
 
   void clear() {
     std::shared_ptr<TarnReportingSystemMonitor> ended;  // dies after the lock
-    const std::lock_guard guard(lock);
+    const MutexLock guard(lock);
     if (instance != nullptr) {
       instance->clear();
       ended = std::move(instance);
     }
   }
 
-  std::mutex lock;
-  std::shared_ptr<TarnReportingSystemMonitor> instance;  // guarded by lock
+  Mutex lock;
+  std::shared_ptr<TarnReportingSystemMonitor> instance TARN_GUARDED_BY(lock);
 };
 
 std::shared_ptr<TarnReportingSystemMonitor> currentInstance() {
   const auto shared = ProcessState::of<Shared>();
-  const std::lock_guard guard(shared->lock);
+  const MutexLock guard(shared->lock);
   return shared->instance;
 }
 
@@ -103,7 +103,7 @@ bool sameState(const plist::Dictionary& a, const plist::Dictionary& b) {
 
 void TarnReportingSystemMonitor::initializeWithQueue(std::shared_ptr<platform::WorkQueue> queue) {
   const auto shared = ProcessState::of<Shared>();
-  const std::lock_guard guard(shared->lock);
+  const MutexLock guard(shared->lock);
   if (shared->instance == nullptr) {
     shared->instance = initWithQueue(std::move(queue));
   }
@@ -160,7 +160,7 @@ TarnReportingSystemMonitor::TarnReportingSystemMonitor(FromInit, std::shared_ptr
 
 void TarnReportingSystemMonitor::populateInitialValues() {
   kLog(LogLevel::Info, "populateInitialValues %@", [this] { return features(); });
-  const std::lock_guard guard(*systemMonitorDictionary_);
+  const MutexLock guard(*systemMonitorDictionary_);
   for (const auto& [name, description] : features_) {
     if (const plist::Dictionary state = getFeatureState(name.text()); !state.empty()) {
       systemMonitorDictionary_->store(name, state);
@@ -178,7 +178,7 @@ void TarnReportingSystemMonitor::listenForFeatureStateChanges() {
 
 void TarnReportingSystemMonitor::listenForFeature(const plist::Key& name, const plist::Dictionary& description) {
   // A handler that runs on another thread before the token is stored waits for it at the lock.
-  const std::lock_guard guard(*systemMonitorDictionary_);
+  const MutexLock guard(*systemMonitorDictionary_);
   const auto registration = TarnReportingFacilities().notifications.registerFor(
       description.get(kNotification).text(), queue_, [weakSelf = weak_from_this(), name](std::int32_t token) {
         if (const auto self = weakSelf.lock()) {
@@ -196,11 +196,9 @@ void TarnReportingSystemMonitor::listenForFeature(const plist::Key& name, const 
 void TarnReportingSystemMonitor::featureChanged(const plist::Key& name, std::int32_t token) {
   kLog(LogLevel::Info, "feature changes featureName=%@ token=%i", name.text(), token);
   {
-    const std::lock_guard guard(*systemMonitorDictionary_);
+    const MutexLock guard(*systemMonitorDictionary_);
     const plist::Dictionary state = getFeatureState(name.text());
-    if (state.empty() || sameState(state, systemMonitorDictionary_->state(name))) {
-      return;
-    }
+    if (state.empty() || sameState(state, systemMonitorDictionary_->state(name))) return;
     systemMonitorDictionary_->store(name, state);
     kLog(LogLevel::Debug, "Updating value featureName=%@", name.text());
   }
@@ -211,13 +209,9 @@ plist::Dictionary TarnReportingSystemMonitor::getFeatureState(std::string_view n
   kLog(LogLevel::Default, "getting feature %@", name);
   const plist::Dictionary features = this->features();
   const plist::ValueView description = features.get(name);
-  if (description.kind() != plist::Kind::Dictionary) {
-    return {};
-  }
+  if (description.kind() != plist::Kind::Dictionary) return {};
   const plist::Value value = readFeature(name, description.dictionary());
-  if (!value.present()) {
-    return {};
-  }
+  if (!value.present()) return {};
   const platform::Clock& clock = TarnReportingFacilities().clock;
   return {{name, value},
           {kTimestamp, clock.epochSeconds()},
@@ -225,7 +219,7 @@ plist::Dictionary TarnReportingSystemMonitor::getFeatureState(std::string_view n
 }
 
 plist::Dictionary TarnReportingSystemMonitor::features() const {
-  const std::lock_guard guard(*systemMonitorDictionary_);
+  const MutexLock guard(*systemMonitorDictionary_);
   return features_;
 }
 

@@ -47,7 +47,7 @@ class TarnReportingSystemMonitor : public std::enable_shared_from_this<TarnRepor
   // not set.
   static plist::Dictionary TarnReportingDefaults();  // NOLINT(readability-identifier-naming): its given name
 
-  // An instance of one's own, read and listening.
+  // An instance beside the shared one, populated and listening.
   static std::shared_ptr<TarnReportingSystemMonitor> initWithQueue(std::shared_ptr<platform::WorkQueue> queue);
   TarnReportingSystemMonitor(FromInit, std::shared_ptr<platform::WorkQueue> queue);  // for initWithQueue
   TarnReportingSystemMonitor(const TarnReportingSystemMonitor&) = delete;
@@ -76,7 +76,8 @@ class TarnReportingSystemMonitor : public std::enable_shared_from_this<TarnRepor
   const plist::Dictionary defaults_;
   const std::shared_ptr<platform::WorkQueue> queue_;
   const std::shared_ptr<TarnReportingSystemMonitorDictionary> systemMonitorDictionary_;
-  plist::Dictionary features_;  // guarded by the dictionary's lock: tokens are stored while handlers may read
+  // Tokens are stored while handlers may read.
+  plist::Dictionary features_ TARN_GUARDED_BY(*systemMonitorDictionary_);
 };
 
 }  // namespace tarn

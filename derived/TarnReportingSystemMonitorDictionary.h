@@ -13,15 +13,15 @@
 
 #include <cstdint>
 #include <memory>
-#include <mutex>
 #include <vector>
 
 #include "platform/UniqueFunction.h"
 #include "plist/Dictionary.h"
+#include "plist/ThreadSafety.h"
 
 namespace tarn {
 
-class TarnReportingSystemMonitorDictionary {
+class TARN_CAPABILITY TarnReportingSystemMonitorDictionary {
  public:
   using Observer = platform::UniqueFunction<void(const plist::Key& feature)>;
   enum class ObserverToken : std::uint64_t {};
@@ -30,8 +30,8 @@ class TarnReportingSystemMonitorDictionary {
   TarnReportingSystemMonitorDictionary(const TarnReportingSystemMonitorDictionary&) = delete;
   TarnReportingSystemMonitorDictionary& operator=(const TarnReportingSystemMonitorDictionary&) = delete;
 
-  void lock() const;
-  void unlock() const;
+  void lock() const TARN_ACQUIRE();
+  void unlock() const TARN_RELEASE();
 
   // The last state of a feature: its value under its own name, "tarnreporting_timestamp" and "systemuptime_sec". Empty
   // when it isn't known.
@@ -42,7 +42,7 @@ class TarnReportingSystemMonitorDictionary {
   // Calls `observer` whenever a new state of the feature was stored; the state is then what state() gives. The observer
   // holds whoever it serves weakly, and goes with removeObserver.
   [[nodiscard]] ObserverToken addObserver(const plist::Key& feature, Observer observer);
-  // A token that is not known is let pass.
+  // An unknown token is ignored.
   void removeObserver(ObserverToken token);
 
   // For the monitor: stores a state without telling anybody, and tells the observers once the lock is released.
@@ -57,10 +57,10 @@ class TarnReportingSystemMonitorDictionary {
     bool removed = false;
   };
 
-  mutable std::recursive_mutex mutex_;  // guards all below, `removed` included
-  plist::Dictionary states_;
-  std::vector<std::shared_ptr<Observation>> observations_;
-  std::uint64_t lastToken_ = 0;
+  mutable RecursiveMutex mutex_;  // guards `removed` of each observation too
+  plist::Dictionary states_ TARN_GUARDED_BY(mutex_);
+  std::vector<std::shared_ptr<Observation>> observations_ TARN_GUARDED_BY(mutex_);
+  std::uint64_t lastToken_ TARN_GUARDED_BY(mutex_) = 0;
 };
 
 }  // namespace tarn

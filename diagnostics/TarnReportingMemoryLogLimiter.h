@@ -5,8 +5,9 @@
 #pragma once
 
 #include <chrono>
-#include <mutex>
 #include <optional>
+
+#include "plist/ThreadSafety.h"
 
 namespace tarn {
 
@@ -18,19 +19,17 @@ class TarnReportingMemoryLogLimiter {
   TarnReportingMemoryLogLimiter(const TarnReportingMemoryLogLimiter&) = delete;
   TarnReportingMemoryLogLimiter& operator=(const TarnReportingMemoryLogLimiter&) = delete;
 
-  // Whether a log may be made now, on the monotonic clock; a yes begins the interval anew. The first is always a yes.
+  // Whether a log may be made now, on the monotonic clock; a yes restarts the interval. The first is always a yes.
   bool claim(std::chrono::nanoseconds now) {
-    const std::lock_guard lock(mutex_);
-    if (lastRun_ && now - *lastRun_ <= kInterval) {
-      return false;
-    }
+    const MutexLock lock(mutex_);
+    if (lastRun_ && now - *lastRun_ <= kInterval) return false;
     lastRun_ = now;
     return true;
   }
 
  private:
-  std::mutex mutex_;
-  std::optional<std::chrono::nanoseconds> lastRun_;  // guarded by mutex_
+  Mutex mutex_;
+  std::optional<std::chrono::nanoseconds> lastRun_ TARN_GUARDED_BY(mutex_);
 };
 
 }  // namespace tarn

@@ -63,9 +63,7 @@ plist::Value loggedSetting(std::string_view key) {
 
 // What isn't above zero, not-a-number included, is no wait.
 std::chrono::nanoseconds heldWait(double microseconds) {
-  if (!(microseconds > 0)) {
-    return std::chrono::nanoseconds::zero();
-  }
+  if (!(microseconds > 0)) return std::chrono::nanoseconds::zero();
   const std::chrono::duration<double, std::micro> wait(microseconds);
   const std::chrono::duration<double, std::micro> longest(TarnReportingSessionDPWorker::kLongestWait);
   return std::chrono::duration_cast<std::chrono::nanoseconds>(std::min(wait, longest));
@@ -84,9 +82,7 @@ void waitFor(std::chrono::nanoseconds time) {
 std::unique_ptr<TarnReportingSessionDPWorker> TarnReportingSessionDPWorker::initWithSession(
     const std::shared_ptr<TarnReportingSession>& session) {
   const bool enabled = getEnableFlag("enable_gyre");
-  if (!enabled || !TarnReportingUtilityIsInternalBuild() || TarnReportingFacilities().gyre == nullptr) {
-    return nullptr;
-  }
+  if (!enabled || !TarnReportingUtilityIsInternalBuild() || TarnReportingFacilities().gyre == nullptr) return nullptr;
   RunTimeSettings settings;
   if (const std::int32_t size = getRunTimeDefaults("io_buffer_size"); size != 0) {
     settings.minimumBufferFrameSize = size;
@@ -115,9 +111,7 @@ double TarnReportingSessionDPWorker::getDoubleRunTimeDefaults(std::string_view k
 }
 
 bool TarnReportingSessionDPWorker::interestedInMessage(const TarnReportingSessionMessage& message) {
-  if (message.type() != AudioEventType::Error || message.category() != AudioEventCategory::IO) {
-    return false;
-  }
+  if (message.type() != AudioEventType::Error || message.category() != AudioEventCategory::IO) return false;
   kLog(LogLevel::Info, "Interested in overload");
   return true;
 }

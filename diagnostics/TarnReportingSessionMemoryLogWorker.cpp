@@ -38,9 +38,7 @@ bool holds(std::string_view line, std::string_view part) {
 
 // Of the resources of each task those that tell about memory and time, without the tasks that wire nothing.
 bool isResourceLine(std::string_view line) {
-  if (holds(line, " wired_mem ")) {
-    return !holds(line, "wired_mem          0           0           0        none");
-  }
+  if (holds(line, " wired_mem ")) return !holds(line, "wired_mem          0           0           0        none");
   constexpr std::array<std::string_view, 4> kWanted{" cpu_time ", " phys_mem ", " phys_footprint ", "RESOURCE"};
   return std::any_of(kWanted.begin(), kWanted.end(), [line](std::string_view part) { return holds(line, part); });
 }
@@ -132,7 +130,7 @@ std::string textOf(ToolRun& run, const Tool& tool, std::chrono::nanoseconds dead
   return std::move(run.text);  // the tool's thread is through with it
 }
 
-// How long the next block is: it ends with the first line that ends behind the least size.
+// How long the next block is: it ends with the first line that ends after the least size.
 std::size_t blockLength(std::string_view text) {
   const std::size_t newline = text.find('\n', kBlockBytes);
   return newline == std::string_view::npos ? std::min(kBlockBytes, text.size()) : newline + 1;
@@ -150,7 +148,7 @@ std::size_t pieceLength(std::string_view block) {
 }
 
 // The log cuts an entry that is too long, so a block that a very long line made goes there in several entries, all
-// under the block's number: what stands behind their heads is the block.
+// under the block's number: what stands after their heads is the block.
 void logBlock(std::size_t number, std::string_view block) {
   while (!block.empty()) {
     const std::string_view piece = block.substr(0, pieceLength(block));
@@ -171,20 +169,14 @@ void logInBlocks(std::string_view text) {
 
 std::unique_ptr<TarnReportingSessionMemoryLogWorker> TarnReportingSessionMemoryLogWorker::initWithSession(
     const std::shared_ptr<TarnReportingSession>& session) {
-  if (session->serviceType() != AudioServiceType::Test && !TarnReportingUtilityIsInternalBuild()) {
-    return nullptr;
-  }
+  if (session->serviceType() != AudioServiceType::Test && !TarnReportingUtilityIsInternalBuild()) return nullptr;
   return std::make_unique<TarnReportingSessionMemoryLogWorker>(session);
 }
 
 void TarnReportingSessionMemoryLogWorker::handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) {
-  if (message->type() != AudioEventType::MemoryLog) {
-    return;
-  }
+  if (message->type() != AudioEventType::MemoryLog) return;
   const platform::Clock& clock = TarnReportingFacilities().clock;
-  if (!ProcessState::of<TarnReportingMemoryLogLimiter>()->claim(clock.monotonic())) {
-    return;
-  }
+  if (!ProcessState::of<TarnReportingMemoryLogLimiter>()->claim(clock.monotonic())) return;
   const auto zones = startTool(kZones);
   const auto resources = startTool(kResources);
   const auto deadline = clock.monotonic() + kPatience;

@@ -27,8 +27,8 @@ constexpr std::string_view kDisplayReason = "a Parley spatial positioning error 
 constexpr double kSecondsIgnored = 5.0;
 
 // On the prompt service's thread, at any time: the worker may be gone.
-void logCompletion(const platform::MaybeError& error) {
-  if (error) {
+void logCompletion(const Status& error) {
+  if (error.failed()) {
     kLog(LogLevel::Error, "Error creating draft - %@", error->text);
   } else {
     kLog(LogLevel::Info, "Successfully created draft");
@@ -40,9 +40,7 @@ void logCompletion(const platform::MaybeError& error) {
 std::unique_ptr<TarnReportingSessionTattleWorker> TarnReportingSessionTattleWorker::initWithSession(
     const std::shared_ptr<TarnReportingSession>& session) {
   const platform::Facilities& facilities = TarnReportingFacilities();
-  if (facilities.tattle == nullptr || !TarnReportingUtilityIsInternalBuild()) {
-    return nullptr;
-  }
+  if (facilities.tattle == nullptr || !TarnReportingUtilityIsInternalBuild()) return nullptr;
   const plist::Value backOff = TarnReportingDiagnosticDefaults().value(kBackOffKey);
   if (!backOff.present()) {
     kLog(LogLevel::Debug, "%@ default not set. Skipping worker. reporterID=%lli", kBackOffKey, session->reporterID());
@@ -93,14 +91,10 @@ bool TarnReportingSessionTattleWorker::interestedInMessage(const TarnReportingSe
 }
 
 void TarnReportingSessionTattleWorker::handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) {
-  if (!interestedInMessage(*message)) {
-    return;
-  }
+  if (!interestedInMessage(*message)) return;
   const std::shared_ptr<TarnReportingSession> owner = session();
   platform::TattleService* const tattle = TarnReportingFacilities().tattle;
-  if (!owner || tattle == nullptr) {
-    return;
-  }
+  if (!owner || tattle == nullptr) return;
   if (hasRun_) {
     kLog(LogLevel::Debug, "Tattle has already run for ParleyXYerrorMessage reporterID=%lli", owner->reporterID());
     return;

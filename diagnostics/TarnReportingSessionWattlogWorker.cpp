@@ -39,9 +39,7 @@ const EventKeys& eventKeys() {
 
 // Nothing while the session is going away.
 std::optional<std::string> applicationNameOf(const std::shared_ptr<TarnReportingSession>& session) {
-  if (!session) {
-    return std::nullopt;
-  }
+  if (!session) return std::nullopt;
   return TarnReportingUtilityRetrieveAppName(session->configuration());
 }
 
@@ -58,9 +56,7 @@ std::unique_ptr<TarnReportingSessionWattlogWorker> TarnReportingSessionWattlogWo
 }
 
 void TarnReportingSessionWattlogWorker::handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) {
-  if (!message || message->type() != AudioEventType::Wattlog) {
-    return;
-  }
+  if (!message || message->type() != AudioEventType::Wattlog) return;
   handleEngineOnDurationMessage(*message);
   handleEngineStateMessage(*message);
   handleLongRunningMessage(*message);
@@ -70,9 +66,7 @@ void TarnReportingSessionWattlogWorker::handleEngineOnDurationMessage(
     const TarnReportingSessionMessage& message) const {
   const EventKeys& names = eventKeys();
   const plist::ValueView onTime = message.message().get(names.engineOnTime);
-  if (!onTime) {
-    return;
-  }
+  if (!onTime) return;
   plist::Dictionary payload;
   payload.set(names.engineOnDuration, onTime);
   const std::optional<std::string> application = applicationNameOf(session());
@@ -92,9 +86,7 @@ void TarnReportingSessionWattlogWorker::handleEngineOnDurationMessage(
 void TarnReportingSessionWattlogWorker::handleEngineStateMessage(const TarnReportingSessionMessage& message) const {
   const EventKeys& names = eventKeys();
   const plist::ValueView state = message.message().get(names.engineState);
-  if (!state) {
-    return;
-  }
+  if (!state) return;
   plist::Dictionary payload;
   payload.set(names.status, state == plist::ValueView("EngineOn") ? 1 : 0);
   if (const std::optional<std::string> application = applicationNameOf(session())) {
@@ -109,9 +101,7 @@ void TarnReportingSessionWattlogWorker::handleEngineStateMessage(const TarnRepor
 void TarnReportingSessionWattlogWorker::handleLongRunningMessage(const TarnReportingSessionMessage& message) const {
   const EventKeys& names = eventKeys();
   const plist::ValueView activeTime = message.message().get(names.activeTime);
-  if (!activeTime) {
-    return;
-  }
+  if (!activeTime) return;
   plist::Dictionary payload;
   payload.set(names.activeTime, activeTime);
   if (const plist::ValueView clients = message.message().get(names.activeClients)) {

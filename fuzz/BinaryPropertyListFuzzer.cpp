@@ -19,11 +19,15 @@ std::size_t nesting(const ValueView& value, std::size_t& count) {
   ++count;
   std::size_t deepest = 0;
   if (value.kind() == Kind::Array) {
-    for (const ValueView& item : value.array()) deepest = std::max(deepest, nesting(item, count));
+    for (const ValueView& item : value.array()) {
+      deepest = std::max(deepest, nesting(item, count));
+    }
     return deepest + 1;
   }
   if (value.kind() == Kind::Dictionary) {
-    for (const Dictionary::Entry& entry : value.dictionary()) deepest = std::max(deepest, nesting(entry.value, count));
+    for (const Dictionary::Entry& entry : value.dictionary()) {
+      deepest = std::max(deepest, nesting(entry.value, count));
+    }
     return deepest + 1;
   }
   return 0;

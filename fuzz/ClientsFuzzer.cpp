@@ -29,7 +29,9 @@ std::vector<std::string>& trail() {
 
 Payload payloadOf(const plist::Dictionary& dictionary) {
   Payload payload;
-  for (const auto& entry : dictionary) payload.emplace(entry.key.text(), plist::Value(entry.value));
+  for (const auto& entry : dictionary) {
+    payload.emplace(entry.key.text(), plist::Value(entry.value));
+  }
   return payload;
 }
 
@@ -91,7 +93,7 @@ class LateWorker : public TarnReportingSessionWorkerProtocol,
 constexpr std::array kWorkers{TarnReportingSessionWorkerClass::of<EarlyWorker>(),
                               TarnReportingSessionWorkerClass::of<LateWorker>()};
 
-// The bytes, one after the other; zeros behind their end.
+// The bytes, one after the other; zeros after their end.
 class Bytes {
  public:
   Bytes(const std::uint8_t* data, std::size_t size) : data_(data), size_(size) {}
@@ -121,10 +123,14 @@ class Run {
     platform_.listener.setDelegate(service_);
     platform_.listener.resume();
     platform_.runUntilIdle();
-    for (Peer& peer : peers_) connect(peer);
+    for (Peer& peer : peers_) {
+      connect(peer);
+    }
   }
   ~Run() {
-    for (const auto& connection : platform_.listener.connections()) connection->invalidate();
+    for (const auto& connection : platform_.listener.connections()) {
+      connection->invalidate();
+    }
     platform_.workQueues.dropAll();
     service_.reset();
   }
@@ -135,7 +141,9 @@ class Run {
     constexpr int kMostSteps = 200;
     for (int done = 0; done < kMostSteps && !bytes_.atEnd(); ++done) {
       step();
-      if (!isHeld_) settle();
+      if (!isHeld_) {
+        settle();
+      }
     }
     settle();
   }
@@ -232,7 +240,9 @@ class Run {
     } else {
       remote.getAllReporters([begin](const auto&, const std::vector<std::int64_t>& reporters) {
         std::string text;
-        for (const std::int64_t reporter : reporters) text += std::to_string(reporter) + ",";
+        for (const std::int64_t reporter : reporters) {
+          text += std::to_string(reporter) + ",";
+        }
         trail().push_back(begin + text);
       });
       model_.askReporters(reply);
@@ -247,7 +257,9 @@ class Run {
     Identifiers reporterIDs;
     if (const std::size_t count = bytes_.take(4); count > 0) {
       reporterIDs.emplace();
-      for (std::size_t named = 1; named < count; ++named) reporterIDs->push_back(bytes_.pick(kIdentifiers));
+      for (std::size_t named = 1; named < count; ++named) {
+        reporterIDs->push_back(bytes_.pick(kIdentifiers));
+      }
     }
     peer.connection->exportedObject()->sendMessage(
         dictionaryOf(message.payload), message.category, message.type, reporterIDs,
@@ -325,7 +337,9 @@ class Run {
   }
   static plist::Dictionary dictionaryOf(const Payload& payload) {
     plist::Dictionary dictionary;
-    for (const auto& [key, value] : payload) dictionary.set(plist::Key(key), value);
+    for (const auto& [key, value] : payload) {
+      dictionary.set(plist::Key(key), value);
+    }
     return dictionary;
   }
 

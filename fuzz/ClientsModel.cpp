@@ -31,7 +31,9 @@ std::string nameOf(std::uint32_t category, std::uint16_t type) {
 }
 
 Payload comparable(Payload payload) {
-  for (const char* key : {"processuptime_ms", "systemuptime_sec", "tarnreporting_timestamp"}) payload.erase(key);
+  for (const char* key : {"processuptime_ms", "systemuptime_sec", "tarnreporting_timestamp"}) {
+    payload.erase(key);
+  }
   return payload;
 }
 
@@ -65,7 +67,9 @@ std::string applicationOf(const ModelSession& session) {
 
 std::string ClientsModel::textOf(const Payload& payload) {
   std::string text;
-  for (const auto& [key, value] : payload) text += key + "=" + value.view().asText() + ";";
+  for (const auto& [key, value] : payload) {
+    text += key + "=" + value.view().asText() + ";";
+  }
   return text;
 }
 
@@ -109,8 +113,12 @@ void ClientsModel::configure(const Client& client, const Payload& configuration,
   later([=, this] {
     if (const Session session = own(*client, reporterID)) {
       const auto mirrored = configuration.find("KvHostApplicationDisplayID");
-      if (mirrored != configuration.end()) session->configuration["HostApplicationDisplayID"] = mirrored->second;
-      for (const auto& [key, value] : configuration) session->configuration[key] = value;
+      if (mirrored != configuration.end()) {
+        session->configuration["HostApplicationDisplayID"] = mirrored->second;
+      }
+      for (const auto& [key, value] : configuration) {
+        session->configuration[key] = value;
+      }
     }
     answer(reply, "true");
   });
@@ -127,12 +135,16 @@ void ClientsModel::start(const Client& client, std::int64_t reporterID, int repl
     startSession(*session);
     finishStart(*session);
     session->heldReply = reply;
-    if (session->type == kTestType && isInternal_) answer(reply, "true");
+    if (session->type == kTestType && isInternal_) {
+      answer(reply, "true");
+    }
   });
 }
 
 void ClientsModel::finishStart(ModelSession& session) {
-  if (session.heldReply) answer(*session.heldReply, "true");
+  if (session.heldReply) {
+    answer(*session.heldReply, "true");
+  }
   session.heldReply.reset();
 }
 
@@ -145,7 +157,9 @@ void ClientsModel::send(ModelRecord message, const Identifiers& reporterIDs, int
       answer(reply, "sys.oxbow.audio.reporting 1");
       return;
     }
-    for (const Session& session : receivers(reporterIDs)) take(*session, message);
+    for (const Session& session : receivers(reporterIDs)) {
+      take(*session, message);
+    }
     answer(reply, "done");
   });
 }
@@ -164,7 +178,9 @@ void ClientsModel::stop(const Client& client, std::int64_t reporterID, int reply
 void ClientsModel::destroy(const Client& client, std::int64_t reporterID, int reply) {
   later([=, this] {
     if (const Session session = own(*client, reporterID)) {
-      if (session->started) stopSession(*session);
+      if (session->started) {
+        stopSession(*session);
+      }
       std::erase(client->sessions, session);
     }
     answer(reply, "true");
@@ -182,7 +198,9 @@ void ClientsModel::askReporters(int reply) {
   later([=, this] {
     std::string text;
     for (const Client& client : clients_) {
-      for (const Session& session : client->sessions) text += std::to_string(session->reporterID) + ",";
+      for (const Session& session : client->sessions) {
+        text += std::to_string(session->reporterID) + ",";
+      }
     }
     answer(reply, text);
   });
@@ -198,7 +216,9 @@ void ClientsModel::lose(const Client& client) {
   later([this, client] {
     if (std::find(clients_.begin(), clients_.end(), client) == clients_.end()) return;
     for (const Session& session : client->sessions) {
-      if (session->started) stopSession(*session);
+      if (session->started) {
+        stopSession(*session);
+      }
     }
     client->sessions.clear();
     std::erase(clients_, client);
@@ -256,13 +276,17 @@ std::vector<ClientsModel::Session> ClientsModel::receivers(const Identifiers& re
   std::vector<Session> found;
   if (reporterIDs && !reporterIDs->empty()) {
     for (const std::int64_t reporterID : *reporterIDs) {
-      if (const Session session = listed(reporterID)) found.push_back(session);
+      if (const Session session = listed(reporterID)) {
+        found.push_back(session);
+      }
     }
     return found;
   }
   for (const Client& client : clients_) {
     for (const Session& session : client->sessions) {
-      if (session->started) found.push_back(session);
+      if (session->started) {
+        found.push_back(session);
+      }
     }
   }
   if (!found.empty()) return found;
@@ -296,9 +320,13 @@ void ClientsModel::startSession(ModelSession& session) {
     session.lateExists = session.type != 3;  // which the late worker declines
     note((session.lateExists ? "late made " : "late declined ") + name);
   }
-  if (!session.earlyRuns) note("early start " + name);
+  if (!session.earlyRuns) {
+    note("early start " + name);
+  }
   session.earlyRuns = true;
-  if (session.lateExists && !session.lateRuns) note("late start " + name);
+  if (session.lateExists && !session.lateRuns) {
+    note("late start " + name);
+  }
   session.lateRuns = session.lateExists;
 }
 
@@ -315,7 +343,9 @@ void ClientsModel::stopSession(ModelSession& session) {
     take(session, {{{"derived", session.log.size() / 2}}, 4, 11});
     session.lateRuns = false;
   }
-  if (session.earlyRuns) note("early stop " + name);
+  if (session.earlyRuns) {
+    note("early stop " + name);
+  }
   session.earlyRuns = false;
   session.log.clear();
   session.total = 0;
@@ -332,12 +362,20 @@ void ClientsModel::take(ModelSession& session, ModelRecord message) {
     message.payload["HostApplicationDisplayID"] = applicationOf(session);
   }
   const bool redundant = isRedundant(session, message);
-  for (const auto& [key, value] : message.payload) session.previous[key] = value;
-  if (!redundant) session.log.push_back(message);
+  for (const auto& [key, value] : message.payload) {
+    session.previous[key] = value;
+  }
+  if (!redundant) {
+    session.log.push_back(message);
+  }
   const std::string text = std::to_string(session.reporterID) + (session.started ? " started" : "") +
                            (redundant ? " redundant " : " ") + textOf(message.payload);
-  if (session.earlyRuns) note("early got " + text);
-  if (session.lateRuns && !redundant) note("late got " + text);
+  if (session.earlyRuns) {
+    note("early got " + text);
+  }
+  if (session.lateRuns && !redundant) {
+    note("late got " + text);
+  }
 }
 
 void ClientsModel::mark(ModelSession& session, bool isStart) const {

@@ -18,7 +18,9 @@ using tarn::recorder::EventQuery;
 using tarn::recorder::EventReader;
 
 void check(bool holds) {
-  if (!holds) std::abort();
+  if (!holds) {
+    std::abort();
+  }
 }
 
 // A folder of this process, gone at its end.
@@ -38,7 +40,9 @@ class Folder {
     for (const auto& entry : std::filesystem::directory_iterator(path_, ignored)) {
       std::filesystem::remove_all(entry.path(), ignored);
     }
-    if (whole) std::filesystem::remove(path_, ignored);
+    if (whole) {
+      std::filesystem::remove(path_, ignored);
+    }
   }
 
  private:

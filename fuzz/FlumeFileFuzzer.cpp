@@ -40,11 +40,11 @@ void look(const FlumeChannel& channel, const FlumeFileBounds& bounds) {
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   const std::string_view text(reinterpret_cast<const char*>(data), size);
   const FlumeFileBounds bounds{8, 8, 8};
-  const FlumeFileReading reading = parseFlumeFile(text, bounds);
-  demand(reading.channels.size() <= bounds.channels);
-  demand(reading.complaint.find('\n') == std::string::npos);
+  const auto reading = parseFlumeFile(text, bounds);
+  demand(reading.value.size() <= bounds.channels);
+  demand(reading.error.text().find('\n') == std::string::npos);
   std::set<std::string> names;
-  for (const FlumeChannel& channel : reading.channels) {
+  for (const FlumeChannel& channel : reading.value) {
     look(channel, bounds);
     demand(names.insert(*channel.name.name).second);
   }

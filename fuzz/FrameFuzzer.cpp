@@ -19,24 +19,26 @@ using namespace tarn::wire;
 constexpr std::size_t kMaxFrameBytes = 4096;
 
 void check(bool holds) {
-  if (!holds) std::abort();
+  if (!holds) {
+    std::abort();
+  }
 }
 
 void checkFrame(RequestDecoder& decoder, std::span<const std::byte> frame) {
   DecodedRequest request;
   Refusal refusal;
-  const DecodeOutcome outcome = decoder.decode(frame, request, refusal);
-  if (outcome != DecodeOutcome::Unreadable) {
+  const DecodeVerdict verdict = decoder.decode(frame, request, refusal);
+  if (verdict != DecodeVerdict::Unreadable) {
     check(checkOneItem(frame) == nullptr);
   }
-  if (outcome != DecodeOutcome::Ok) {
+  if (verdict != DecodeVerdict::Ok) {
     check(!refusal.text.empty());
     return;
   }
   std::string once;
   Encoder(once).request(request.id, request);
   DecodedRequest again;
-  check(decoder.decode(std::as_bytes(std::span(once)).subspan(kFrameHeaderBytes), again, refusal) == DecodeOutcome::Ok);
+  check(decoder.decode(std::as_bytes(std::span(once)).subspan(kFrameHeaderBytes), again, refusal) == DecodeVerdict::Ok);
   std::string twice;
   Encoder(twice).request(again.id, again);
   check(once == twice);

@@ -5,8 +5,8 @@
 #include <string_view>
 
 #include "diagnostics/pylon/AudioIssueDetected.h"
+#include "diagnostics/pylon/ProtobufText.h"
 #include "diagnostics/pylon/TextFields.h"
-#include "diagnostics/pylon/TextLines.h"
 #include "diagnostics/pylon/WireReader.h"
 #include "diagnostics/pylon/WireWriter.h"
 
@@ -15,14 +15,16 @@ namespace {
 using namespace pylonmetrics;
 
 void check(bool holds) {
-  if (!holds) std::abort();
+  if (!holds) {
+    std::abort();
+  }
 }
 
 void checkText(const AudioIssueDetected& record) {
   TextFields fields;
   record.formatText(fields, "record");
   check(fields.fields().size() == (record.hasTimestamp() ? 5U : 4U));
-  TextLines lines;
+  ProtobufText lines;
   record.formatText(lines, "record");
   for (const char character : lines.text()) {
     check(character == '\n' || (character >= ' ' && character <= '~'));

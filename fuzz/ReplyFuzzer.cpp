@@ -15,13 +15,19 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   wire::DecodedReply reply;
   std::string reason;
   if (!decoder.decode(frame, reply, reason)) {
-    if (reason.empty()) std::abort();
+    if (reason.empty()) {
+      std::abort();
+    }
     return 0;
   }
-  if (wire::checkOneItem(frame) != nullptr) std::abort();
+  if (wire::checkOneItem(frame) != nullptr) {
+    std::abort();
+  }
   std::string out;
   for (const plist::Value& result : reply.results) {
-    if (!result.present()) std::abort();
+    if (!result.present()) {
+      std::abort();
+    }
     wire::appendValue(out, result);
   }
   return 0;

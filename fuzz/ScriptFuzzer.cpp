@@ -16,18 +16,13 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t siz
     const std::size_t end = std::min(rest.find('\n'), rest.size());
     const std::string_view text = rest.substr(0, end);
     rest.remove_prefix(std::min(end + 1, rest.size()));
-    if (isBlank(text)) {
-      continue;
-    }
-    const auto parsed = parseLine(text, line);
-    if (const auto* fault = std::get_if<Fault>(&parsed); fault != nullptr && fault->text.empty()) {
+    if (isBlank(text)) continue;
+    const auto [step, error] = parseLine(text, line);
+    const bool isSane = error.failed()
+                            ? !error->text.empty()
+                            : step.line == line && !step.op.empty() && !step.client.empty() && step.seconds >= 0;
+    if (!isSane) {
       std::abort();
-    }
-    if (const auto* step = std::get_if<ScriptStep>(&parsed)) {
-      const bool isSane = step->line == line && !step->op.empty() && !step->client.empty() && step->seconds >= 0;
-      if (!isSane) {
-        std::abort();
-      }
     }
   }
   return 0;

@@ -1,4 +1,4 @@
-// Bytes as a performance trace and, behind the first NUL, as descriptions of probes: they give intervals within the
+// Bytes as a performance trace and, after the first NUL, as descriptions of probes: they give intervals within the
 // trace or a failure, and probes of those intervals.
 #include <algorithm>
 #include <cstddef>
@@ -35,16 +35,16 @@ void look(const std::vector<Probe>& probes, const ChromeTrace& trace) {
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   const std::string_view input(reinterpret_cast<const char*>(data), size);
   const std::size_t end = std::min(input.find('\0'), input.size());
-  const ReadTrace read = parseTrace(input.substr(0, end));
-  demand(read.failure.empty() || read.trace.intervals.empty());
+  const auto read = parseTrace(input.substr(0, end));
+  demand(read.ok() || read.value.intervals.empty());
   std::int64_t last = INT64_MIN;
-  for (const Interval& interval : read.trace.intervals) {
+  for (const Interval& interval : read.value.intervals) {
     demand(interval.duration >= 0 && interval.begin >= last);
-    demand(interval.name < read.trace.texts.size() && interval.subsystem < read.trace.texts.size());
+    demand(interval.name < read.value.texts.size() && interval.subsystem < read.value.texts.size());
     last = interval.begin;
   }
-  const ReadProbes probes = probesFor(input.substr(std::min(end + 1, input.size())), read.trace);
-  demand(probes.failure.empty() || probes.probes.empty());
-  look(probes.probes, read.trace);
+  const auto probes = probesFor(input.substr(std::min(end + 1, input.size())), read.value);
+  demand(probes.ok() || probes.value.empty());
+  look(probes.value, read.value);
   return 0;
 }

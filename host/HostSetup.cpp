@@ -3,65 +3,54 @@
 #include <utility>
 
 #include "host/log/LogTarget.h"
-#include "host/settings/StateFolder.h"
+#include "host/settings/StateDirectory.h"
+#include "host/system/Files.h"
 
 namespace tarn::linux_host {
 
 namespace {
 
 // The listening socket: the one handed over, else the right to the one named.
-ListenSocket::Result openSocket(const ServiceOptions& options) {
-  ListenSocket::Result handedOver = ListenSocket::takeHandedOver();
-  if (handedOver.socket || !handedOver.error.empty()) {
-    return handedOver;
-  }
+Result<ListenSocket> openSocket(const ServiceOptions& options) {
+  Result<ListenSocket> handedOver = ListenSocket::takeHandedOver();
+  if (handedOver.value || handedOver.failed()) return handedOver;
   if (!options.socketPath) {
-    handedOver.error = "no socket: none was handed over, and neither --socket nor XDG_RUNTIME_DIR names one";
-    return handedOver;
+    return {{}, Error{0, "no socket: none was handed over, and neither --socket nor XDG_RUNTIME_DIR names one"}};
   }
   if (options.socketIsDefault) {
-    makeFolder(options.socketPath->substr(0, options.socketPath->rfind('/')), 0755);  // binding tells when it failed
+    const std::string folder = options.socketPath->substr(0, options.socketPath->rfind('/'));
+    static_cast<void>(createDirectories(folder, 0755));  // binding tells when it failed
   }
   return ListenSocket::claim(*options.socketPath);
 }
 
 }  // namespace
 
-std::optional<Refusal> HostSetup::prepare(const ServiceOptions& options) {
-  if (auto refusal = readSettings(options)) {
-    return refusal;
-  }
-  if (std::string error = prepareStateDirectory(options.stateDirectory); !error.empty()) {
-    return Refusal{std::move(error)};
+Status HostSetup::prepare(const ServiceOptions& options) {
+  if (const Status read = readSettings(options); read.failed()) return Error{kExitConfiguration, read->text};
+  if (const Status prepared = prepareStateDirectory(options.stateDirectory); prepared.failed()) {
+    return Error{kExitFailure, prepared->text};
   }
   signals = std::make_shared<SignalSource>();
-  ListenSocket::Result opened = openSocket(options);
-  if (!opened.socket) {
-    return Refusal{std::move(opened.error)};
-  }
-  socket = std::move(opened.socket);
-  if (std::string error = holdStateDirectory(options.stateDirectory, stateLock_); !error.empty()) {
-    return Refusal{std::move(error)};
+  Result<ListenSocket> opened = openSocket(options);
+  if (opened.failed()) return Error{kExitFailure, opened.error->text};
+  socket = std::move(opened.value);
+  if (const Status held = holdStateDirectory(options.stateDirectory, stateLock_); held.failed()) {
+    return Error{kExitFailure, held->text};
   }
   OpenedLog opening = openLog(options.logTarget, options.logLevel, clock);
   log = std::move(opening.log);
-  return log ? std::nullopt : std::optional<Refusal>(std::in_place, std::move(opening.error));
+  if (!log) return Error{kExitFailure, std::move(opening.error)};
+  return {};
 }
 
-std::optional<Refusal> HostSetup::readSettings(const ServiceOptions& options) {
+Status HostSetup::readSettings(const ServiceOptions& options) {
   if (options.configurationFile) {
-    ReadConfiguration read = readConfiguration(*options.configurationFile);
-    if (!read.configuration) {
-      return Refusal{std::move(read.error), kExitConfiguration};
-    }
-    configuration = std::move(*read.configuration);
+    Result<HostConfiguration> read = readConfiguration(*options.configurationFile);
+    if (read.failed()) return std::move(read.error);
+    configuration = std::move(read.value);
   }
-  if (options.devicePropertiesFile) {
-    if (std::string error = deviceProperties.load(*options.devicePropertiesFile); !error.empty()) {
-      return Refusal{std::move(error), kExitConfiguration};
-    }
-  }
-  return std::nullopt;
+  return options.devicePropertiesFile ? deviceProperties.load(*options.devicePropertiesFile) : Status();
 }
 
 }  // namespace tarn::linux_host

@@ -5,8 +5,6 @@
 #pragma once
 
 #include <memory>
-#include <optional>
-#include <string>
 
 #include "host/loop/SignalSource.h"
 #include "host/machine/LinuxClock.h"
@@ -16,14 +14,9 @@
 #include "host/socket/ListenSocket.h"
 #include "host/system/FileLock.h"
 #include "platform/Log.h"
+#include "plist/Result.h"
 
 namespace tarn::linux_host {
-
-// Why the service doesn't run.
-struct Refusal {
-  std::string complaint;  // one line for whoever started it
-  int exitStatus = kExitFailure;
-};
 
 class HostSetup {
  public:
@@ -31,8 +24,9 @@ class HostSetup {
   HostSetup(const HostSetup&) = delete;
   HostSetup& operator=(const HostSetup&) = delete;
 
-  // Called once. What is in the way, if anything; then nothing else may be used.
-  [[nodiscard]] std::optional<Refusal> prepare(const ServiceOptions& options);
+  // Called once. An error tells what is in the way, in one line for whoever started the service, and its code is the
+  // exit status; then nothing else may be used.
+  [[nodiscard]] Status prepare(const ServiceOptions& options);
 
   HostConfiguration configuration;
   JsonDeviceProperties deviceProperties;
@@ -42,7 +36,7 @@ class HostSetup {
   std::unique_ptr<platform::Log> log;
 
  private:
-  std::optional<Refusal> readSettings(const ServiceOptions& options);
+  Status readSettings(const ServiceOptions& options);
 
   FileLock stateLock_;
 };

@@ -7,8 +7,10 @@
 #include <utility>
 
 #include "host/log/HostLog.h"
-#include "host/settings/StateFolder.h"
+#include "host/loop/Settling.h"
 #include "host/system/DescriptorLimit.h"
+#include "host/system/Files.h"
+#include "host/system/SystemError.h"
 
 namespace tarn::linux_host {
 
@@ -110,12 +112,10 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
   });
 }
 
-std::string LinuxPlatform::start() {
-  if (!loop_.startError().empty()) {
-    return loop_.startError();
-  }
-  if (const int error = makeFolder(temporaryDirectory_, 0750); error != 0) {
-    return temporaryDirectory_ + errorSuffix(error);
+Status LinuxPlatform::start() {
+  if (loop_.setUp().failed()) return loop_.setUp();
+  if (const Status made = createDirectories(temporaryDirectory_, 0750); made.failed()) {
+    return errorOf(temporaryDirectory_, *made);
   }
   recorder_.start();
   // A large file is read through first; until that is over nothing could be committed in time.
@@ -123,11 +123,11 @@ std::string LinuxPlatform::start() {
   return {};
 }
 
-std::string LinuxPlatform::listen(ListenSocket socket, const std::shared_ptr<platform::ListenerDelegate>& delegate,
-                                  ServiceCount serviceCounts) {
-  if (std::string error = socket.listen(); !error.empty()) {
+Status LinuxPlatform::listen(ListenSocket socket, const std::shared_ptr<platform::ListenerDelegate>& delegate,
+                             ServiceCount serviceCounts) {
+  if (Status listening = socket.listen(); listening.failed()) {
     recorder_.shutdown();
-    return error;
+    return listening;
   }
   serviceCounts_ = std::move(serviceCounts);
   connections_.setStatusSource([this] { return status(); });
@@ -175,14 +175,9 @@ void LinuxPlatform::end() {
 
 // What the workers' own queues hold reaches the recorder too, unless a back-end keeps it waiting.
 void LinuxPlatform::settleQueues() {
-  std::size_t left = workQueues_.unfinished();
-  while (!workQueues_.settle(settleTime_)) {
-    const std::size_t before = std::exchange(left, workQueues_.unfinished());
-    if (left >= before) {
-      hostLog(log_, kHostCategory, platform::LogLevel::Default, kModule,
-              std::to_string(left) + " pieces of work of the workers' queues are left undone");
-      return;
-    }
+  if (const std::size_t left = settleWhileShrinking(workQueues_, settleTime_); left > 0) {
+    hostLog(log_, kHostCategory, platform::LogLevel::Default, kModule,
+            std::to_string(left) + " pieces of work of the workers' queues are left undone");
   }
 }
 

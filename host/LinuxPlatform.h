@@ -44,6 +44,7 @@
 #include "platform/Log.h"
 #include "platform/ProcessControl.h"
 #include "platform/UniqueFunction.h"
+#include "plist/Result.h"
 #include "recorder/Recorder.h"
 #include "recorder/RecorderGyreService.h"
 #include "recorder/RecorderPylonService.h"
@@ -77,11 +78,11 @@ class LinuxPlatform final : private platform::ProcessControl {
   const platform::Facilities& facilities() const noexcept { return facilities_; }
   MainLoop& loop() noexcept { return loop_; }
 
-  // Starts what has threads, and waits until the recorder's file is open. What went wrong, or nothing.
-  [[nodiscard]] std::string start();
-  // Lets clients connect, once whoever they are handed to is whole. What went wrong, or nothing.
-  [[nodiscard]] std::string listen(ListenSocket socket, const std::shared_ptr<platform::ListenerDelegate>& delegate,
-                                   ServiceCount serviceCounts);
+  // Starts what has threads, and waits until the recorder's file is open.
+  [[nodiscard]] Status start();
+  // Lets clients connect, once whoever they are handed to is whole.
+  [[nodiscard]] Status listen(ListenSocket socket, const std::shared_ptr<platform::ListenerDelegate>& delegate,
+                              ServiceCount serviceCounts);
   // Serves until the loop is stopped, then serves the requests that were taken and makes safe what the recorder holds.
   void serve();
 

@@ -3,8 +3,8 @@
 
 #include <cstdint>
 
-#include "platform/Outcome.h"
 #include "plist/Dictionary.h"
+#include "plist/Result.h"
 
 namespace tarn::platform {
 
@@ -14,8 +14,9 @@ enum class AccessoryPart : std::int32_t { Left = 0, Right = 1, Case = 2 };
 class AccessoryQueries {
  public:
   virtual ~AccessoryQueries() = default;
-  // Looks for accessories anew; how many there are. The indexes below count within the last enumeration.
-  virtual Outcome<std::uint16_t> enumerate() = 0;
+  // Looks for accessories again; how many there are. The indexes below count within the last enumeration.
+  virtual Result<std::uint16_t> enumerate() = 0;
+  // Whether the accessory comes with a charging case. An index beyond the last enumeration has none.
   virtual bool hasCase(std::uint16_t accessoryIndex) const = 0;
   // What is known about a part; empty when there is no such part. The accessory as a whole carries "lastConnectedEpoch"
   // (seconds since 1970) in each of its parts.

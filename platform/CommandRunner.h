@@ -10,7 +10,7 @@
 #include <string>
 #include <string_view>
 
-#include "platform/Outcome.h"
+#include "plist/Result.h"
 
 namespace tarn::platform {
 
@@ -45,8 +45,8 @@ class CommandRunner {
   // Hands `commandText` to the system shell. Its standard input is empty and its error output is dropped. `timeLimit`
   // counts from here. A tool that doesn't exist is not an error here: the shell runs, prints nothing and exits with
   // kNotFound.
-  virtual Outcome<std::unique_ptr<RunningCommand>> start(std::string_view commandText,
-                                                         std::chrono::nanoseconds timeLimit) = 0;
+  virtual Result<std::unique_ptr<RunningCommand>> start(std::string_view commandText,
+                                                        std::chrono::nanoseconds timeLimit) = 0;
 };
 
 }  // namespace tarn::platform

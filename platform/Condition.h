@@ -7,13 +7,16 @@
 #include <chrono>
 #include <memory>
 
+#include "plist/ThreadSafety.h"
+
 namespace tarn::platform {
 
-class Condition {
+class TARN_CAPABILITY Condition {
  public:
   virtual ~Condition() = default;
-  virtual void lock() = 0;
-  virtual void unlock() = 0;
+  // The lock that what is waited for is read and changed under; not to be taken twice.
+  virtual void lock() TARN_ACQUIRE() = 0;
+  virtual void unlock() TARN_RELEASE() = 0;
   // Waits, locked before and after, until it is signalled or `timeout` has passed; false means the time is up. May wake
   // without a signal.
   virtual bool waitFor(std::chrono::duration<double> timeout) = 0;
@@ -24,9 +27,10 @@ class Condition {
 class Conditions {
  public:
   virtual ~Conditions() = default;
+  // A new condition, unlocked; never null.
   virtual std::shared_ptr<Condition> makeCondition() = 0;
-  // Work that blocks the server queue on purpose, like a wait: until what is returned is let go of, on the same thread.
-  // Nothing waits within it.
+  // Work that blocks the server queue on purpose, like a wait: until the returned handle is destroyed, on the same
+  // thread. Nothing waits within it.
   [[nodiscard]] virtual std::shared_ptr<void> blockOnPurpose() = 0;
 };
 

@@ -9,7 +9,7 @@
 #include <string>
 #include <string_view>
 
-#include "platform/Outcome.h"
+#include "plist/Result.h"
 
 namespace tarn::platform {
 
@@ -19,10 +19,10 @@ class WritableFile {
   virtual ~WritableFile() = default;
   // Appends the bytes. They are in the file when it returns; after an error some may be. Each call goes to the disk by
   // itself, so whoever has many small pieces joins them.
-  [[nodiscard]] virtual MaybeError write(std::string_view bytes) = 0;
+  [[nodiscard]] virtual Status write(std::string_view bytes) = 0;
   // Closes; an error may belong to an earlier write, which the disk carried out later. The file is closed afterwards,
   // whatever the result; later calls fail.
-  [[nodiscard]] virtual MaybeError close() = 0;
+  [[nodiscard]] virtual Status close() = 0;
 };
 
 enum class WellKnownDirectory {
@@ -37,17 +37,17 @@ class FileSystem {
   virtual std::string wellKnownDirectory(WellKnownDirectory which) const = 0;
   // Makes the directory and what is missing above it, each with these permissions less the process's mask. One that is
   // there already is left as it is, and that is a success.
-  [[nodiscard]] virtual MaybeError createDirectories(std::string_view path, std::uint32_t permissions) = 0;
+  [[nodiscard]] virtual Status createDirectories(std::string_view path, std::uint32_t permissions) = 0;
   // Makes an empty file; fails when there is something at the path.
-  [[nodiscard]] virtual MaybeError createFile(std::string_view path) = 0;
+  [[nodiscard]] virtual Status createFile(std::string_view path) = 0;
   // Opens a file that exists, and empties it.
-  virtual Outcome<std::unique_ptr<WritableFile>> openForWriting(std::string_view path) = 0;
+  virtual Result<std::unique_ptr<WritableFile>> openForWriting(std::string_view path) = 0;
   // The whole content of a file; fails when it is larger than `mostBytes`.
-  virtual Outcome<std::string> readFile(std::string_view path, std::size_t mostBytes) = 0;
+  virtual Result<std::string> readFile(std::string_view path, std::size_t mostBytes) = 0;
   // Whether there is something at the path; false also when that can't be found out.
   virtual bool exists(std::string_view path) const = 0;
   // Moves a file, onto another file system too, replacing what is there; never leaves half a file at `to`.
-  [[nodiscard]] virtual MaybeError moveFile(std::string_view from, std::string_view to) = 0;
+  [[nodiscard]] virtual Status moveFile(std::string_view from, std::string_view to) = 0;
 };
 
 }  // namespace tarn::platform

@@ -12,7 +12,7 @@
 #include <string>
 #include <vector>
 
-#include "platform/Outcome.h"
+#include "plist/Result.h"
 
 namespace tarn::platform {
 
@@ -68,22 +68,23 @@ class FlumeService {
   struct Subscribed {
     std::shared_ptr<FlumeSubscription> subscription;  // none: it failed
     std::shared_ptr<const FlumeChannelSet> channels;  // those that were subscribed, maybe not all; none: it failed
-    MaybeError error;
+    Status error;
   };
-  using SamplesOutcome = Outcome<std::shared_ptr<const FlumeSamples>>;
+  using SamplesResult = Result<std::shared_ptr<const FlumeSamples>>;
 
   virtual ~FlumeService() = default;
   // The channels of a group and sub-group; a missing name matches any.
-  virtual Outcome<std::shared_ptr<const FlumeChannelSet>> copyChannels(const std::optional<std::string>& group,
-                                                                       const std::optional<std::string>& subGroup) = 0;
+  virtual Result<std::shared_ptr<const FlumeChannelSet>> copyChannels(const std::optional<std::string>& group,
+                                                                      const std::optional<std::string>& subGroup) = 0;
+  // Begins to watch the channels, until the subscription is destroyed.
   virtual Subscribed subscribe(const FlumeChannelSet& channels) = 0;
   // What the subscribed channels hold now. A channel that can't be read is missing from it.
-  virtual SamplesOutcome createSamples(FlumeSubscription& subscription, const FlumeChannelSet& subscribedChannels) = 0;
+  virtual SamplesResult createSamples(FlumeSubscription& subscription, const FlumeChannelSet& subscribedChannels) = 0;
   // Later minus earlier for values, hits, transitions and residencies, the later sample's own for the rest. Hits,
-  // transitions or residencies that fell mean that the driver began anew: the later number counts. Against nothing it
+  // transitions or residencies that fell mean that the driver restarted: the later number counts. Against nothing it
   // is the later sample.
-  virtual SamplesOutcome createDelta(const std::shared_ptr<const FlumeSamples>& earlier,
-                                     const std::shared_ptr<const FlumeSamples>& later) = 0;
+  virtual SamplesResult createDelta(const std::shared_ptr<const FlumeSamples>& earlier,
+                                    const std::shared_ptr<const FlumeSamples>& later) = 0;
 };
 
 }  // namespace tarn::platform

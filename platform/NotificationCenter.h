@@ -27,8 +27,9 @@ class NotificationCenter {
   // Calls `handler` on `queue` for every post of `name` from now on. Posts that come close together may be delivered as
   // one. No call begins after cancel() when cancel() is called on `queue`.
   virtual Registration registerFor(std::string_view name, std::shared_ptr<WorkQueue> queue, Handler handler) = 0;
-  // The state word of the notification behind the token; nothing when it can't be read.
+  // The state word of the token's notification; nothing when it can't be read.
   virtual std::optional<std::uint64_t> state(std::int32_t token) const = 0;
+  // Ends the registration. An unknown token is ignored.
   virtual void cancel(std::int32_t token) = 0;
   // Posts the notification, with its state word set first when one is given. Whether that worked.
   [[nodiscard]] virtual bool post(std::string_view name, std::optional<std::uint64_t> state) = 0;

@@ -9,7 +9,7 @@
 #include <memory>
 #include <string>
 
-#include "platform/Outcome.h"
+#include "plist/Result.h"
 
 namespace tarn::platform {
 
@@ -21,20 +21,24 @@ struct PerformanceTraceConfiguration {
 class PerformanceTraceDelegate {
  public:
   virtual ~PerformanceTraceDelegate() = default;
-  virtual void performanceTraceDidStart(const MaybeError& error) = 0;
-  virtual void performanceTraceDidStop(const MaybeError& error) = 0;
-  // Beside an error the location is empty. The token is the facility's own name for the trace.
+  // The trace runs; beside an error it never did.
+  virtual void performanceTraceDidStart(const Status& error) = 0;
+  // It records no more; its file is still to be completed. Beside an error there will be none.
+  virtual void performanceTraceDidStop(const Status& error) = 0;
+  // The file lies complete at `location`. Beside an error the location is empty. The token is the facility's own name
+  // for the trace.
   virtual void performanceTraceDidComplete(const std::string& location, const std::string& token,
-                                           const MaybeError& error) = 0;
+                                           const Status& error) = 0;
 };
 
 class PerformanceTraceSession {
  public:
   virtual ~PerformanceTraceSession() = default;
-  // Set before start(); an empty pointer takes it away. Threads: any, also within a callback.
+  // Who is told; set before startTrace(). An empty pointer takes it away. Threads: any, also within a callback.
   virtual void setDelegate(std::weak_ptr<PerformanceTraceDelegate> delegate) = 0;
-  // Both return at once.
+  // Asks for the start and returns at once; the delegate is told of the outcome.
   virtual void startTrace() = 0;
+  // Asks for the stop and returns at once; the delegate is told when the trace is complete.
   virtual void stopTrace() = 0;
   // Whether there is a trace that can be stopped.
   virtual bool isValid() const = 0;

@@ -7,7 +7,7 @@ class ProcessControl {
  public:
   virtual ~ProcessControl() = default;
   // Ends the process with this status, once what the back-ends still hold is safe. Sessions are not stopped. On a
-  // device it doesn't return; a fake does, so callers return right behind it.
+  // device it doesn't return; a fake does, so callers return right after it.
   virtual void exitProcess(int status) = 0;
 };
 

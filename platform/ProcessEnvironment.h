@@ -6,7 +6,7 @@
 
 #include <string_view>
 
-#include "platform/Outcome.h"
+#include "plist/Result.h"
 
 namespace tarn::platform {
 
@@ -14,7 +14,7 @@ class ProcessEnvironment {
  public:
   virtual ~ProcessEnvironment() = default;
   // Sets the variable, replacing a value that it has.
-  [[nodiscard]] virtual MaybeError set(std::string_view name, std::string_view value) = 0;
+  [[nodiscard]] virtual Status set(std::string_view name, std::string_view value) = 0;
 };
 
 }  // namespace tarn::platform

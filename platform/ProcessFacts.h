@@ -5,6 +5,8 @@
 #include <optional>
 #include <string>
 
+#include "plist/Result.h"
+
 namespace tarn::platform {
 
 enum class ThermalState : std::int32_t { Nominal = 0, Fair = 1, Serious = 2, Critical = 3 };
@@ -17,19 +19,18 @@ struct LoadAverages {
 
 class ProcessFacts {
  public:
-  struct Footprint {
-    std::optional<std::uint64_t> bytes;  // nothing when the query failed
-    std::string error;                   // the platform's text for the failure
-  };
-
   virtual ~ProcessFacts() = default;
+  // Of this process; greater than 0.
   virtual std::int32_t ownProcessIdentifier() const = 0;
   // The name of a process; nothing when it is gone or hidden.
   virtual std::optional<std::string> processName(std::int32_t processIdentifier) const = 0;
   // Physical memory that this process holds (resident or swapped out), in bytes.
-  virtual Footprint physicalFootprint() const = 0;
+  virtual Result<std::uint64_t> physicalFootprint() const = 0;
+  // How warm the device is now.
   virtual ThermalState thermalState() const = 0;
+  // Whether the device saves power now.
   virtual bool lowPowerModeEnabled() const = 0;
+  // The mean numbers of running and waiting threads over the last 1, 5 and 15 minutes.
   virtual LoadAverages loadAverages() const = 0;
 };
 

@@ -11,9 +11,9 @@
 #include <string_view>
 #include <vector>
 
-#include "platform/Outcome.h"
 #include "platform/UniqueFunction.h"
 #include "plist/Dictionary.h"
+#include "plist/Result.h"
 
 namespace tarn::platform {
 
@@ -39,7 +39,7 @@ class RtcReportingSession {
   using StartCompletion = UniqueFunction<void(const std::optional<std::vector<std::string>>& backends)>;
   struct SendResult {
     bool sent = false;
-    MaybeError error{};  // a message may fail without one
+    Status error{};  // a message may fail without one
   };
 
   virtual ~RtcReportingSession() = default;

@@ -4,7 +4,7 @@
 // operations, so that no call is made, no clock is read and nothing is formed. What is recorded belongs to the
 // subsystem "sys.oxbow.tarnkit".
 //
-// Texts in a signpost must live for ever: names are kept as they are and read later. Threads: any. Nothing fails: what
+// Texts in a signpost must be static: names are kept as they are and read later. Threads: any. Nothing fails: what
 // a recorder can't take it counts by itself.
 #pragma once
 

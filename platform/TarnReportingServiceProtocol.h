@@ -18,7 +18,7 @@
 namespace tarn::platform {
 
 struct RemoteError {
-  std::string_view domain;  // a text that lives for ever
+  std::string_view domain;  // a static text
   std::int64_t code = 0;
   std::string text;
 };
@@ -34,20 +34,29 @@ using ReporterIDs = std::optional<std::vector<std::int64_t>>;
 class TarnReportingServiceProtocol {
  public:
   virtual ~TarnReportingServiceProtocol() = default;
+  // Makes a session under this ID of the client's choice, in place of the one that it has there.
   virtual void createReportingSession(std::int64_t reporterID, Acknowledge reply) = 0;
+  // Types the session. One that has a type already is replaced by a new one of the new type, not started, which keeps
+  // configuration and latest values.
   virtual void setServiceType(std::uint16_t serviceType, std::int64_t reporterID, Acknowledge reply) = 0;
   // Despite its name it answers the service type: 65535 for an unknown session.
   virtual void getServiceNameForReporterID(std::int64_t reporterID, Reply<std::uint16_t> reply) = 0;
+  // Merges the configuration into the session's.
   virtual void setConfiguration(plist::Dictionary configuration, std::int64_t reporterID, Acknowledge reply) = 0;
-  // The reply is held until the session stops.
+  // Makes the workers of the session's type and starts them. The reply is held until the session stops.
   virtual void startReportingSessionForID(std::int64_t reporterID, Acknowledge reply) = 0;
+  // Hands each of these sessions a record of the message. Refused with an error while reporting is disabled.
   virtual void sendMessage(plist::Dictionary message, std::uint32_t category, std::uint16_t type,
                            ReporterIDs reporterIDs, Reply<> reply) = 0;
+  // Stops the session, which stays and may be started again; the held reply of its start goes out first.
   virtual void stopReportingSessionForID(std::int64_t reporterID, Acknowledge reply) = 0;
+  // Stops the session if it runs, and drops it; the held reply of its start never comes.
   virtual void destroyReportingSession(std::int64_t reporterID, Acknowledge reply) = 0;
   // Answers "reporterID" and "serviceType"; 0 and 65535 for an unknown session.
   virtual void reporterID(std::int64_t reporterID, Reply<plist::Dictionary> reply) = 0;
+  // Answers the reporter IDs of all sessions of all clients.
   virtual void getAllReporters(Reply<std::vector<std::int64_t>> reply) = 0;
+  // Ends the process at once, without a reply.
   virtual void killService() = 0;
 
   // No remote operations: what the client has now, for whoever bounds that. Threads: the server queue's.

@@ -10,8 +10,8 @@
 #include <string_view>
 #include <vector>
 
-#include "platform/Outcome.h"
 #include "platform/UniqueFunction.h"
+#include "plist/Result.h"
 
 namespace tarn::platform {
 
@@ -32,7 +32,7 @@ struct TattleDraft {
 class TattleService {
  public:
   // Called once, with what went wrong or with nothing.
-  using Completion = UniqueFunction<void(const MaybeError& error)>;
+  using Completion = UniqueFunction<void(const Status& error)>;
 
   virtual ~TattleService() = default;
   // Offers the draft, on behalf of a process when its name is known, with the reason that the person is shown.

@@ -1,100 +1,12 @@
-// Locks whose use the compiler checks: what a lock guards says so where it is declared, and touching it without the
-// lock is an error (clang's -Wthread-safety, part of ./dev lint). Other compilers read none of the notes.
-//
-//   mutable platform::Mutex mutex_;
-//   std::size_t count_ TARN_GUARDED_BY(mutex_) = 0;
-//   void add() TARN_REQUIRES(mutex_);  // called with the lock held
-//
-// A function that lets go of its caller's lock for a while calls mutex_.unlock() and mutex_.lock() itself.
+// The checked locks of plist/ThreadSafety.h, by the names that what stands on the platform uses.
 #pragma once
 
-#include <condition_variable>
-#include <mutex>
-#include <utility>
-
-#ifdef __clang__
-#define TARN_THREAD_NOTE(note) __attribute__((note))
-#else
-#define TARN_THREAD_NOTE(note)
-#endif
-
-#define TARN_GUARDED_BY(mutex) TARN_THREAD_NOTE(guarded_by(mutex))
-#define TARN_REQUIRES(mutex) TARN_THREAD_NOTE(requires_capability(mutex))
+#include "plist/ThreadSafety.h"
 
 namespace tarn::platform {
 
-class TARN_THREAD_NOTE(capability("mutex")) Mutex {
- public:
-  Mutex() = default;
-  Mutex(const Mutex&) = delete;
-  Mutex& operator=(const Mutex&) = delete;
-
-  void lock() TARN_THREAD_NOTE(acquire_capability()) { mutex_.lock(); }
-  void unlock() TARN_THREAD_NOTE(release_capability()) { mutex_.unlock(); }
-
- private:
-  friend class ConditionVariable;
-
-  std::mutex mutex_;
-};
-
-// Holds the lock to the end of its scope.
-class TARN_THREAD_NOTE(scoped_lockable) MutexLock {
- public:
-  explicit MutexLock(Mutex& mutex) TARN_THREAD_NOTE(acquire_capability(mutex)) : mutex_(mutex) { mutex_.lock(); }
-  MutexLock(const MutexLock&) = delete;
-  MutexLock& operator=(const MutexLock&) = delete;
-  ~MutexLock() TARN_THREAD_NOTE(release_capability()) { mutex_.unlock(); }
-
- private:
-  Mutex& mutex_;
-};
-
-// std::condition_variable on such a lock, which is held before and after each wait. A predicate says that it runs under
-// the lock: [this]() TARN_REQUIRES(mutex_) { return stopping_; }
-class ConditionVariable {
- public:
-  void notifyOne() noexcept { variable_.notify_one(); }
-  void notifyAll() noexcept { variable_.notify_all(); }
-
-  void wait(Mutex& mutex) TARN_REQUIRES(mutex) {
-    Lent lent(mutex.mutex_);
-    variable_.wait(lent.lock);
-  }
-  template <class Predicate>
-  void wait(Mutex& mutex, Predicate predicate) TARN_REQUIRES(mutex) {
-    Lent lent(mutex.mutex_);
-    variable_.wait(lent.lock, std::move(predicate));
-  }
-  // Those with a time are false when it was up: without a predicate, whatever else holds; with one, if it doesn't hold.
-  template <class Duration>
-  bool waitFor(Mutex& mutex, const Duration& longest) TARN_REQUIRES(mutex) {
-    Lent lent(mutex.mutex_);
-    return variable_.wait_for(lent.lock, longest) == std::cv_status::no_timeout;
-  }
-  template <class Duration, class Predicate>
-  bool waitFor(Mutex& mutex, const Duration& longest, Predicate predicate) TARN_REQUIRES(mutex) {
-    Lent lent(mutex.mutex_);
-    return variable_.wait_for(lent.lock, longest, std::move(predicate));
-  }
-  template <class Moment>
-  bool waitUntil(Mutex& mutex, const Moment& moment) TARN_REQUIRES(mutex) {
-    Lent lent(mutex.mutex_);
-    return variable_.wait_until(lent.lock, moment) == std::cv_status::no_timeout;
-  }
-
- private:
-  // The caller's lock, in the shape that the standard wants.
-  struct Lent {
-    explicit Lent(std::mutex& mutex) : lock(mutex, std::adopt_lock) {}
-    Lent(const Lent&) = delete;
-    Lent& operator=(const Lent&) = delete;
-    ~Lent() { lock.release(); }
-
-    std::unique_lock<std::mutex> lock;
-  };
-
-  std::condition_variable variable_;
-};
+using tarn::ConditionVariable;
+using tarn::Mutex;
+using tarn::MutexLock;
 
 }  // namespace tarn::platform

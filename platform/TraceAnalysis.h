@@ -8,8 +8,8 @@
 #include <string_view>
 #include <vector>
 
-#include "platform/Outcome.h"
 #include "plist/Dictionary.h"
+#include "plist/Result.h"
 
 namespace tarn::platform {
 
@@ -34,13 +34,14 @@ class TraceModel {
  public:
   virtual ~TraceModel() = default;
   // All signpost intervals, in the order of the trace.
-  virtual Outcome<std::vector<SignpostInterval>> allSignpostIntervals() = 0;
+  virtual Result<std::vector<SignpostInterval>> allSignpostIntervals() = 0;
 };
 
 class TraceAnalysisLibrary {
  public:
   virtual ~TraceAnalysisLibrary() = default;
-  virtual Outcome<std::shared_ptr<TraceModel>> openTrace(std::string_view location) = 0;
+  // Opens the trace file at this path. The model is never null without an error.
+  virtual Result<std::shared_ptr<TraceModel>> openTrace(std::string_view location) = 0;
   // The probes that the descriptions ask for, in their order; a description that asks for none is skipped.
   virtual std::vector<TraceProbe> probesForDictionaries(const std::vector<plist::Dictionary>& descriptions,
                                                         TraceModel& trace) = 0;

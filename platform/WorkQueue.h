@@ -19,7 +19,7 @@ using Work = UniqueFunction<void()>;
 class WorkQueue {
  public:
   virtual ~WorkQueue() = default;
-  // Runs `work` behind everything handed over before.
+  // Runs `work` after everything handed over before.
   virtual void async(Work work) = 0;
   // Hands `work` over once `delay` has passed, never earlier. Equal moments keep the order of the calls.
   virtual void asyncAfter(std::chrono::nanoseconds delay, Work work) = 0;
@@ -70,7 +70,7 @@ class WorkQueues {
  public:
   virtual ~WorkQueues() = default;
   // A new serial queue. Queues other than the user-interactive one share a small pool of threads, each keeping its own
-  // order. Work that is still waiting when its last owner lets go of a queue is run all the same.
+  // order. Work that still waits when the last owner drops a queue is run all the same.
   virtual std::shared_ptr<WorkQueue> makeSerialQueue(std::string_view name, QualityOfService quality) = 0;
   // The same, for whoever waits on a queue of its own: a thousand waits cost no thread.
   virtual std::shared_ptr<SuspendableQueue> makeSuspendableQueue(std::string_view name, QualityOfService quality) = 0;

@@ -8,9 +8,7 @@ namespace tarn::plist {
 namespace detail {
 
 void releaseArrayBody(Body* body) noexcept {
-  if (body == nullptr || body->references.fetch_sub(1, std::memory_order_acq_rel) != 1) {
-    return;
-  }
+  if (body == nullptr || body->references.fetch_sub(1, std::memory_order_acq_rel) != 1) return;
   if (body->holdsContainers != 0) {
     releaseContainers(body->data(), body->end());
   }
@@ -43,9 +41,7 @@ std::size_t Array::size() const noexcept {
 }
 
 ValueView Array::operator[](std::size_t index) const noexcept {
-  if (index >= size()) {
-    return {};
-  }
+  if (index >= size()) return {};
   const std::byte* at = body_->data();
   for (; index > 0; --index) {
     at += Packed::sizeAt(at);
@@ -55,9 +51,7 @@ ValueView Array::operator[](std::size_t index) const noexcept {
 
 void Array::append(const ValueView& value) {
   const std::size_t added = Packed::sizeOf(value);
-  if (added == 0) {
-    return;
-  }
+  if (added == 0) return;
   const Array before = *this;  // keeps what `value` may look into, and makes this block a shared one
   const std::size_t old = body_ == nullptr ? 0 : body_->bytes;
   detail::Body* body = detail::makeBody(old + added);

@@ -19,17 +19,13 @@ void appendPadded(std::string& out, int value, int width) {
 }  // namespace
 
 std::optional<CalendarDate> calendarDate(double epochSeconds) noexcept {
-  if (!(epochSeconds >= kYear1 && epochSeconds < kYear10000)) {
-    return std::nullopt;
-  }
+  if (!(epochSeconds >= kYear1 && epochSeconds < kYear10000)) return std::nullopt;
   double whole = std::floor(epochSeconds);
   auto micros = static_cast<std::int64_t>(std::llround((epochSeconds - whole) * 1e6));
   if (micros == 1000000) {
     micros = 0;
     whole += 1;
-    if (whole >= kYear10000) {
-      return std::nullopt;
-    }
+    if (whole >= kYear10000) return std::nullopt;
   }
   using namespace std::chrono;
   const sys_seconds moment{seconds(static_cast<std::int64_t>(whole))};

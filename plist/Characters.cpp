@@ -18,22 +18,16 @@ std::size_t lengthBehind(unsigned char lead) {
 std::optional<char32_t> takeCharacter(std::string_view& text) {
   const auto lead = static_cast<unsigned char>(text.front());
   const std::size_t length = lengthBehind(lead);
-  if (length == 0 || length > text.size()) {
-    return std::nullopt;
-  }
+  if (length == 0 || length > text.size()) return std::nullopt;
   constexpr unsigned char kLeadBits[] = {0, 0x7F, 0x1F, 0x0F, 0x07};
   char32_t character = lead & kLeadBits[length];
   for (std::size_t index = 1; index < length; ++index) {
     const auto next = static_cast<unsigned char>(text[index]);
-    if ((next & 0xC0) != 0x80) {
-      return std::nullopt;
-    }
+    if ((next & 0xC0) != 0x80) return std::nullopt;
     character = (character << 6) | (next & 0x3F);
   }
   constexpr char32_t kLeast[] = {0, 0, 0x80, 0x800, 0x10000};  // a longer form of a smaller character is malformed
-  if (character < kLeast[length] || character > 0x10FFFF) {
-    return std::nullopt;
-  }
+  if (character < kLeast[length] || character > 0x10FFFF) return std::nullopt;
   text.remove_prefix(length);
   return character;
 }

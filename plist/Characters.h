@@ -9,7 +9,7 @@
 namespace tarn::plist {
 
 // Takes one character off the front of a text that isn't empty; nothing, and nothing taken, when it is malformed. A
-// surrogate in UTF-8 clothes is taken as it is.
+// surrogate encoded as UTF-8 is taken as it is.
 std::optional<char32_t> takeCharacter(std::string_view& text);
 // Appends the character, which is at most U+10FFFF.
 void appendCharacter(std::string& out, char32_t character);

@@ -13,9 +13,7 @@ namespace tarn::plist {
 namespace detail {
 
 void releaseDictionaryBody(Body* body) noexcept {
-  if (body == nullptr || body->references.fetch_sub(1, std::memory_order_acq_rel) != 1) {
-    return;
-  }
+  if (body == nullptr || body->references.fetch_sub(1, std::memory_order_acq_rel) != 1) return;
   if (body->holdsContainers != 0) {
     releaseContainers(body->data(), body->end());
   }
@@ -52,7 +50,7 @@ std::size_t storageBytesBehind(const ValueView& value) noexcept {
   }
 }
 
-// The list with these keys behind it. One or two are what bursts of settings bring, over and over: such a list
+// The list with these keys after its own. One or two are what bursts of settings bring, over and over: such a list
 // remembers how it was extended.
 KeyList keysWith(KeyList list, std::span<const Key* const> added) {
   constexpr std::size_t kFew = 2;
@@ -110,9 +108,7 @@ Dictionary Dictionary::fromEntries(std::span<const Entry> entries) {
     containers = containers || isContainer(entry.value);
   }
   std::optional<KeyList> list = KeyList::make(std::span<const Key* const>(keys));
-  if (!list || list->empty()) {
-    return {};
-  }
+  if (!list || list->empty()) return {};
   Body* body = detail::makeBody(bytes);
   body->holdsContainers = containers ? 1 : 0;
   body->keys = std::exchange(list->body_, nullptr);
@@ -141,9 +137,7 @@ std::size_t Dictionary::size() const noexcept {
 }
 
 KeyList Dictionary::keys() const noexcept {
-  if (body_ == nullptr) {
-    return {};
-  }
+  if (body_ == nullptr) return {};
   detail::retainKeyList(body_->keys);
   return KeyList(body_->keys);
 }
@@ -214,9 +208,7 @@ static Body* splice(Body* body, std::size_t offset, std::size_t removed, std::sp
 
 void Dictionary::set(const Key& key, const ValueView& value) {
   const std::size_t size = Packed::sizeOf(value);
-  if (size == 0) {
-    return;
-  }
+  if (size == 0) return;
   // The value is packed before the block is touched, because it may look into that block.
   std::array<std::byte, 128> small;
   std::vector<std::byte> large(size > small.size() ? size : 0);
@@ -244,9 +236,7 @@ void Dictionary::set(const Key& key, const ValueView& value) {
 
 bool Dictionary::remove(const Key& key) {
   const std::size_t index = body_ == nullptr ? KeyList::npos : detail::indexInKeyList(body_->keys, key);
-  if (index == KeyList::npos) {
-    return false;
-  }
+  if (index == KeyList::npos) return false;
   if (size() == 1) {
     clear();
     return true;
@@ -259,9 +249,7 @@ bool Dictionary::remove(const Key& key) {
 }
 
 void Dictionary::merge(const Dictionary& other) {
-  if (other.body_ == nullptr || body_ == other.body_) {
-    return;
-  }
+  if (other.body_ == nullptr || body_ == other.body_) return;
   if (body_ == nullptr) {
     *this = other;
     return;
@@ -335,9 +323,7 @@ std::uint64_t Dictionary::keysHash() const noexcept {
 }
 
 std::size_t Dictionary::storageBytes() const noexcept {
-  if (body_ == nullptr) {
-    return 0;
-  }
+  if (body_ == nullptr) return 0;
   std::size_t bytes = sizeof(Body) + body_->bytes;
   if (body_->holdsContainers != 0) {
     for (const Entry& entry : *this) {
@@ -348,9 +334,7 @@ std::size_t Dictionary::storageBytes() const noexcept {
 }
 
 std::size_t Array::storageBytes() const noexcept {
-  if (body_ == nullptr) {
-    return 0;
-  }
+  if (body_ == nullptr) return 0;
   std::size_t bytes = sizeof(Body) + body_->bytes;
   if (body_->holdsContainers != 0) {
     for (const ValueView& item : *this) {

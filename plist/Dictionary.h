@@ -42,7 +42,7 @@ class Array {
   std::size_t size() const noexcept;
   bool empty() const noexcept { return body_ == nullptr; }
   ValueView operator[](std::size_t index) const noexcept;  // walks the items before it; absent beyond the end
-  // Stores a value behind all others, in a block of its own; to make a long array use PackedBuilder.
+  // Stores a value after all others, in a block of its own; to make a long array use PackedBuilder.
   void append(const ValueView& value);
   std::size_t storageBytes() const noexcept;  // as of a dictionary
 
@@ -98,7 +98,7 @@ class Dictionary {
   bool contains(std::string_view key) const noexcept;
   bool contains(const char* key) const noexcept { return contains(std::string_view(key)); }
 
-  // Stores a value: in the place that the key has, else behind all others. An absent value is not stored.
+  // Stores a value: in the place that the key has, else after all others. An absent value is not stored.
   // `value` may look into this very dictionary.
   void set(const Key& key, const ValueView& value);
   bool remove(const Key& key);  // whether it was there

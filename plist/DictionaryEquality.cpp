@@ -30,9 +30,7 @@ std::size_t firstDifference(const std::byte* a, const std::byte* b, std::size_t 
     std::uint64_t wordB = 0;
     std::memcpy(&wordA, a + at, 8);
     std::memcpy(&wordB, b + at, 8);
-    if (wordA != wordB) {
-      return at + static_cast<std::size_t>(__builtin_ctzll(wordA ^ wordB)) / 8;
-    }
+    if (wordA != wordB) return at + static_cast<std::size_t>(__builtin_ctzll(wordA ^ wordB)) / 8;
   }
   while (at < size && a[at] == b[at]) {
     ++at;
@@ -44,7 +42,7 @@ bool isIgnored(const Key& key, std::span<const Key> ignored) noexcept {
   return std::find(ignored.begin(), ignored.end(), key) != ignored.end();
 }
 
-// Two dictionaries of one key list: ignored values are passed over unseen, equal bytes many at a time, and only the
+// Two dictionaries of one key list: ignored values are skipped unseen, equal bytes many at a time, and only the
 // values that hold a difference are looked at.
 bool equalWithSameKeys(const Body& a, const Body& b, std::span<const Key> ignored) noexcept {
   const Key* key = a.keys->keys();
@@ -58,9 +56,7 @@ bool equalWithSameKeys(const Body& a, const Body& b, std::span<const Key> ignore
       continue;
     }
     const auto left = static_cast<std::size_t>(std::min(a.end() - atA, b.end() - atB));
-    if (a.end() - atA == b.end() - atB && std::memcmp(atA, atB, left) == 0) {
-      return true;
-    }
+    if (a.end() - atA == b.end() - atB && std::memcmp(atA, atB, left) == 0) return true;
     // Values that are equal byte for byte end together, so the difference lies before either end.
     const std::byte* const differing = atA + firstDifference(atA, atB, left);
     std::size_t size = Packed::sizeAt(atA);
@@ -69,9 +65,7 @@ bool equalWithSameKeys(const Body& a, const Body& b, std::span<const Key> ignore
       atB += size;
       ++key;
     }
-    if (!isIgnored(*key, ignored) && !(Packed::read(atA) == Packed::read(atB))) {
-      return false;
-    }
+    if (!isIgnored(*key, ignored) && !(Packed::read(atA) == Packed::read(atB))) return false;
     atA += size;
     atB += Packed::sizeAt(atB);
     ++key;
@@ -89,20 +83,14 @@ bool equalWithOtherKeys(const Body& a, const Body& b, std::span<const Key> ignor
     }
     return count;
   };
-  if (counted(*a.keys) != counted(*b.keys)) {
-    return false;
-  }
+  if (counted(*a.keys) != counted(*b.keys)) return false;
   const std::vector<std::uint32_t> offsets = offsetsOf(b);
   std::size_t index = 0;
   for (const std::byte* at = a.data(); at != a.end(); at += Packed::sizeAt(at)) {
     const Key& key = a.keys->keys()[index++];
-    if (isIgnored(key, ignored)) {
-      continue;
-    }
+    if (isIgnored(key, ignored)) continue;
     const std::size_t position = detail::indexInKeyList(b.keys, key);
-    if (position == KeyList::npos || !(Packed::read(at) == Packed::read(b.data() + offsets[position]))) {
-      return false;
-    }
+    if (position == KeyList::npos || !(Packed::read(at) == Packed::read(b.data() + offsets[position]))) return false;
   }
   return true;
 }
@@ -110,9 +98,7 @@ bool equalWithOtherKeys(const Body& a, const Body& b, std::span<const Key> ignor
 }  // namespace
 
 bool Dictionary::equalsIgnoring(const Dictionary& other, std::span<const Key> ignored) const noexcept {
-  if (body_ == other.body_) {
-    return true;
-  }
+  if (body_ == other.body_) return true;
   if (body_ == nullptr || other.body_ == nullptr) {
     const Dictionary& one = body_ == nullptr ? other : *this;
     return std::all_of(one.begin(), one.end(), [&](const Entry& entry) { return isIgnored(entry.key, ignored); });

@@ -14,7 +14,9 @@ inline void appendHex(std::string& out, char byte) {
 }
 
 inline void appendHex(std::string& out, std::string_view bytes) {
-  for (const char byte : bytes) appendHex(out, byte);
+  for (const char byte : bytes) {
+    appendHex(out, byte);
+  }
 }
 
 }  // namespace tarn::plist

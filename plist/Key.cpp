@@ -3,11 +3,11 @@
 #include <atomic>
 #include <cstdlib>
 #include <cstring>
-#include <mutex>
 #include <new>
 #include <unordered_map>
 
 #include "plist/KeyText.h"
+#include "plist/ThreadSafety.h"
 
 namespace tarn::plist {
 
@@ -40,8 +40,8 @@ struct Hasher {
 
 // Every text in use, found by itself. A text leaves the table, under its lock, when the last key lets go.
 struct Table {
-  std::mutex mutex;
-  std::unordered_map<std::string_view, detail::KeyText*, Hasher> texts;
+  Mutex mutex;
+  std::unordered_map<std::string_view, detail::KeyText*, Hasher> texts TARN_GUARDED_BY(mutex);
 };
 
 Table& table() {
@@ -51,9 +51,7 @@ Table& table() {
 
 detail::KeyText* makeText(std::string_view text) {
   void* memory = std::malloc(sizeof(detail::KeyText) + text.size());
-  if (memory == nullptr) {
-    throw std::bad_alloc();
-  }
+  if (memory == nullptr) throw std::bad_alloc();
   auto* made = ::new (memory) detail::KeyText{
       {1}, static_cast<std::uint32_t>(text.size()), Key::hashOf(text), text.find(' ') != std::string_view::npos};
   if (!text.empty()) {
@@ -68,7 +66,7 @@ namespace detail {
 
 KeyText* internText(std::string_view text) {
   Table& all = table();
-  const std::lock_guard lock(all.mutex);
+  const MutexLock lock(all.mutex);
   if (const auto found = all.texts.find(text); found != all.texts.end()) {
     found->second->references.fetch_add(1, std::memory_order_relaxed);
     return found->second;
@@ -79,16 +77,12 @@ KeyText* internText(std::string_view text) {
 }
 
 void releaseText(KeyText* text) noexcept {
-  if (text == nullptr || !releaseUnlessLast(text->references)) {
-    return;
-  }
+  if (text == nullptr || !releaseUnlessLast(text->references)) return;
   // The last reference goes under the lock, so that nobody finds a text that is about to be freed.
   Table& all = table();
   {
-    const std::lock_guard lock(all.mutex);
-    if (text->references.fetch_sub(1, std::memory_order_acq_rel) != 1) {
-      return;
-    }
+    const MutexLock lock(all.mutex);
+    if (text->references.fetch_sub(1, std::memory_order_acq_rel) != 1) return;
     all.texts.erase(text->text());
   }
   std::free(text);

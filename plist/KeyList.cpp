@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <cstdlib>
-#include <mutex>
 #include <new>
 #include <unordered_map>
 #include <unordered_set>
@@ -10,6 +9,7 @@
 
 #include "plist/KeyListBody.h"
 #include "plist/KeyText.h"
+#include "plist/ThreadSafety.h"
 
 namespace tarn::plist {
 
@@ -20,8 +20,8 @@ using detail::KeyListBody;
 constexpr std::size_t kLinearLimit = 16;  // up to here looking at every key is quicker than an index
 
 struct Table {
-  std::mutex mutex;
-  std::unordered_multimap<std::uint64_t, KeyListBody*> lists;
+  Mutex mutex;
+  std::unordered_multimap<std::uint64_t, KeyListBody*> lists TARN_GUARDED_BY(mutex);
 };
 
 Table& table() {
@@ -38,9 +38,7 @@ std::size_t indexSlots(std::size_t count) {
 }
 
 void buildIndex(KeyListBody* body) {
-  if (body->count <= kLinearLimit) {
-    return;
-  }
+  if (body->count <= kLinearLimit) return;
   const std::size_t slots = indexSlots(body->count);
   body->index = std::make_unique<std::uint32_t[]>(slots);
   body->indexMask = slots - 1;
@@ -58,9 +56,7 @@ std::size_t findIndexed(const KeyListBody& body, std::uint64_t hash, const Match
   std::size_t slot = hash & body.indexMask;
   while (body.index[slot] != 0) {
     const std::size_t position = body.index[slot] - 1;
-    if (matches(body.keys()[position])) {
-      return position;
-    }
+    if (matches(body.keys()[position])) return position;
     slot = (slot + 1) & body.indexMask;
   }
   return KeyList::npos;
@@ -70,9 +66,7 @@ std::size_t findIndexed(const KeyListBody& body, std::uint64_t hash, const Match
 // holds `body`, which holds that list.
 KeyListBody* extendedBefore(const KeyListBody& body, const Key& key) noexcept {
   KeyListBody* const extended = body.extended.load(std::memory_order_acquire);
-  if (extended == nullptr || !(extended->keys()[body.count] == key)) {
-    return nullptr;
-  }
+  if (extended == nullptr || !(extended->keys()[body.count] == key)) return nullptr;
   detail::retainKeyList(extended);
   return extended;
 }
@@ -94,9 +88,7 @@ void destroyBody(KeyListBody* body) noexcept {
 KeyListBody* makeBody(std::span<const Key> head, const Key* last, std::uint64_t hash) {
   const std::size_t count = head.size() + (last != nullptr ? 1 : 0);
   void* memory = std::malloc(sizeof(KeyListBody) + count * sizeof(Key));
-  if (memory == nullptr) {
-    throw std::bad_alloc();
-  }
+  if (memory == nullptr) throw std::bad_alloc();
   auto* body = ::new (memory) KeyListBody{};
   body->references = 1;
   body->count = static_cast<std::uint32_t>(count);
@@ -111,10 +103,10 @@ KeyListBody* makeBody(std::span<const Key> head, const Key* last, std::uint64_t 
   return body;
 }
 
-// The list of this hash that matches, with one more reference; null when there is none. The table is locked.
+// The list of this hash that matches, with one more reference; null when there is none.
 template <class Matches>
-KeyListBody* findList(const Table& locked, std::uint64_t hash, const Matches& matches) {
-  const auto [begin, end] = locked.lists.equal_range(hash);
+KeyListBody* findList(Table& all, std::uint64_t hash, const Matches& matches) TARN_REQUIRES(all.mutex) {
+  const auto [begin, end] = all.lists.equal_range(hash);
   for (auto found = begin; found != end; ++found) {
     if (matches(*found->second)) {
       found->second->references.fetch_add(1, std::memory_order_relaxed);
@@ -124,18 +116,16 @@ KeyListBody* findList(const Table& locked, std::uint64_t hash, const Matches& ma
   return nullptr;
 }
 
-// The list of `head` and, unless null, `last` behind it, found or made, with one more reference.
+// The list of `head` and, unless null, `last` after it, found or made, with one more reference.
 KeyListBody* internList(std::span<const Key> head, const Key* last, std::uint64_t hash) {
   const std::size_t count = head.size() + (last != nullptr ? 1 : 0);
   Table& all = table();
-  const std::lock_guard lock(all.mutex);
+  const MutexLock lock(all.mutex);
   KeyListBody* const found = findList(all, hash, [&](const KeyListBody& body) {
     return body.count == count && std::equal(head.begin(), head.end(), body.keys()) &&
            (last == nullptr || body.keys()[count - 1] == *last);
   });
-  if (found != nullptr) {
-    return found;
-  }
+  if (found != nullptr) return found;
   KeyListBody* made = makeBody(head, last, hash);
   all.lists.emplace(hash, made);
   return made;
@@ -172,10 +162,8 @@ void releaseKeyList(KeyListBody* body) noexcept {
   while (body != nullptr && releaseUnlessLast(body->references)) {
     Table& all = table();
     {
-      const std::lock_guard lock(all.mutex);
-      if (body->references.fetch_sub(1, std::memory_order_acq_rel) != 1) {
-        return;
-      }
+      const MutexLock lock(all.mutex);
+      if (body->references.fetch_sub(1, std::memory_order_acq_rel) != 1) return;
       const auto [begin, end] = all.lists.equal_range(body->hash);
       all.lists.erase(std::find_if(begin, end, [&](const auto& entry) { return entry.second == body; }));
     }
@@ -210,12 +198,8 @@ std::optional<KeyList> KeyList::make(std::span<const std::string_view> texts) {
 }
 
 std::optional<KeyList> KeyList::make(std::span<const Key> keys) {
-  if (keys.empty()) {
-    return KeyList();
-  }
-  if (hasRepeats(keys)) {
-    return std::nullopt;
-  }
+  if (keys.empty()) return KeyList();
+  if (hasRepeats(keys)) return std::nullopt;
   return KeyList(internList(keys, nullptr, hashOfKeys(keys)));
 }
 
@@ -231,10 +215,8 @@ std::optional<KeyList> KeyList::make(std::span<const Key* const> keys) {
   };
   Table& all = table();
   {
-    const std::lock_guard lock(all.mutex);
-    if (detail::KeyListBody* const found = findList(all, hash, matches)) {
-      return KeyList(found);
-    }
+    const MutexLock lock(all.mutex);
+    if (detail::KeyListBody* const found = findList(all, hash, matches)) return KeyList(found);
   }
   std::vector<Key> held;
   held.reserve(keys.size());
@@ -263,9 +245,7 @@ bool KeyList::hasBlanks() const noexcept {
 }
 
 bool KeyList::hasPrefix(const KeyListBody& body, std::string_view prefix) noexcept {
-  if (prefix.empty()) {
-    return body.count != 0;
-  }
+  if (prefix.empty()) return body.count != 0;
   const auto starts = [prefix](const Key& key) {
     const std::string_view text = key.text_->text();
     // The first character alone rules out most keys.
@@ -289,9 +269,7 @@ std::uint64_t KeyList::combineHash(std::uint64_t hash, std::uint64_t keyHash) no
 }
 
 KeyList KeyList::appending(const Key& key) const {
-  if (KeyListBody* const known = body_ == nullptr ? nullptr : extendedBefore(*body_, key)) {
-    return KeyList(known);
-  }
+  if (KeyListBody* const known = body_ == nullptr ? nullptr : extendedBefore(*body_, key)) return KeyList(known);
   const std::span<const Key> head(body_ == nullptr ? nullptr : body_->keys(), size());
   KeyListBody* const made = internList(head, &key, combineHash(hash(), key.hash()));
   if (body_ != nullptr) {
@@ -309,9 +287,7 @@ KeyList KeyList::removing(std::size_t index) const {
 namespace detail {
 
 std::size_t indexInKeyList(const KeyListBody* body, const Key& key) noexcept {
-  if (body == nullptr) {
-    return KeyList::npos;
-  }
+  if (body == nullptr) return KeyList::npos;
   if (body->index) {
     return findIndexed(*body, key.hash(), [&](const Key& other) { return other == key; });
   }
@@ -321,13 +297,9 @@ std::size_t indexInKeyList(const KeyListBody* body, const Key& key) noexcept {
 }
 
 std::size_t indexInKeyList(const KeyListBody* body, std::string_view text) noexcept {
-  if (body == nullptr) {
-    return KeyList::npos;
-  }
+  if (body == nullptr) return KeyList::npos;
   const auto matches = [&](const Key& other) { return other.text() == text; };
-  if (body->index) {
-    return findIndexed(*body, Key::hashOf(text), matches);
-  }
+  if (body->index) return findIndexed(*body, Key::hashOf(text), matches);
   const Key* const end = body->keys() + body->count;
   const Key* const found = std::find_if(body->keys(), end, matches);
   return found == end ? KeyList::npos : static_cast<std::size_t>(found - body->keys());

@@ -51,7 +51,7 @@ class KeyList {
   std::uint64_t hash() const noexcept;
   static std::uint64_t combineHash(std::uint64_t hash, std::uint64_t keyHash) noexcept;
 
-  // This list with one more key behind it (the key is not in it yet), or without the key at `index`.
+  // This list with one more key at its end (the key is not in it yet), or without the key at `index`.
   KeyList appending(const Key& key) const;
   KeyList removing(std::size_t index) const;
 

@@ -17,7 +17,7 @@ struct KeyListBody {
   std::unique_ptr<std::uint32_t[]> index;  // of long lists: position + 1 by hash, 0 for a free slot
   std::size_t indexMask = 0;
   bool hasBlanks = false;
-  // The first list that was made of this one by a key behind it, set once and held: whoever adds keys to dictionaries
+  // The first list that was made of this one by one more key, set once and held: whoever adds keys to dictionaries
   // adds the same ones in the same order, and would else make the list and drop it with every dictionary.
   std::atomic<KeyListBody*> extended{nullptr};
 

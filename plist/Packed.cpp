@@ -29,9 +29,7 @@ void checkSize(std::size_t bytes) {
 Body* makeBody(std::size_t bytes) {
   checkSize(bytes);
   void* memory = std::malloc(allocationFor(bytes));
-  if (memory == nullptr) {
-    throw std::bad_alloc();
-  }
+  if (memory == nullptr) throw std::bad_alloc();
   Body* body = ::new (memory) Body{{1}, 0, 0, {nullptr}};
   body->bytes = static_cast<std::uint32_t>(bytes) & 0x7FFFFFFFU;
   return body;
@@ -42,9 +40,7 @@ Body* resizeBody(Body* body, std::size_t bytes) {
   if (allocationFor(bytes) != allocationFor(body->bytes)) {
     // A block holds plain bytes and a counter that nobody else looks at now, so it may be moved as bytes.
     void* memory = std::realloc(static_cast<void*>(body), allocationFor(bytes));
-    if (memory == nullptr) {
-      throw std::bad_alloc();
-    }
+    if (memory == nullptr) throw std::bad_alloc();
     body = static_cast<Body*>(memory);
   }
   body->bytes = static_cast<std::uint32_t>(bytes) & 0x7FFFFFFFU;

@@ -77,7 +77,7 @@ class Packed {
  public:
   // Bytes that the value takes.
   static std::size_t sizeOf(const ValueView& value) noexcept;
-  // Writes the value, counting a container once more; returns the place behind it.
+  // Writes the value, counting a container once more; returns the place after it.
   static std::byte* write(std::byte* to, const ValueView& value) noexcept;
   static ValueView read(const std::byte* at) noexcept;
   static bool isContainer(const std::byte* at) noexcept { return tagAt(at) >= Tag::Array; }

@@ -8,16 +8,12 @@
 namespace tarn::plist {
 
 std::optional<KeyList> KeyListCache::find(std::uint64_t hash, std::span<const std::string_view> texts) {
-  if (texts.size() > kLongestKept) {
-    return KeyList::make(texts);
-  }
+  if (texts.size() > kLongestKept) return KeyList::make(texts);
   if (slots_.empty()) {
     slots_.resize(kSlots);
   }
   KeyList& slot = slots_[hash % kSlots];
-  if (slot.hash() == hash && slot.equals(texts)) {
-    return slot;
-  }
+  if (slot.hash() == hash && slot.equals(texts)) return slot;
   std::optional<KeyList> made = KeyList::make(texts);
   if (made) {
     slot = *made;

@@ -16,7 +16,7 @@
 namespace tarn::plist {
 
 // Key lists seen lately, found by their texts without the process-wide lock. Bounded: 256 lists of at most 64 keys
-// each; a longer list is made anew every time, so that nobody can fill the cache with huge ones.
+// each; a longer list is made again every time, so that nobody can fill the cache with huge ones.
 class KeyListCache {
  public:
   // The list of these texts, whose combined hash is `hash`; nothing when a text stands there twice.

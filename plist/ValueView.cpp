@@ -14,18 +14,14 @@ namespace {
 constexpr double kTwoTo63 = 9223372036854775808.0;
 constexpr double kTwoTo64 = 18446744073709551616.0;
 
-// The part of a text that is a number: leading white space passed over, then sign, digits, point and exponent.
+// The part of a text that is a number: leading white space skipped, then sign, digits, point and exponent.
 std::string_view numberPart(std::string_view text) noexcept {
   const std::size_t begin = text.find_first_not_of(" \t\n\v\f\r");
-  if (begin == std::string_view::npos) {
-    return {};
-  }
+  if (begin == std::string_view::npos) return {};
   text.remove_prefix(begin);
   if (text.front() == '+') {
     text.remove_prefix(1);
-    if (!text.empty() && text.front() == '-') {
-      return {};
-    }
+    if (!text.empty() && text.front() == '-') return {};
   }
   const std::size_t first = !text.empty() && text.front() == '-' ? 1 : 0;
   const bool isDigitOrPoint = first < text.size() && (text[first] == '.' || (text[first] >= '0' && text[first] <= '9'));
@@ -88,21 +84,15 @@ bool numbersEqual(const ValueView& a, const ValueView& b) noexcept {
   if (isFloating(a)) return integerEqualsFloating(b, a.asDouble());
   if (isFloating(b)) return integerEqualsFloating(a, b.asDouble());
   const bool leftUnsigned = a.kind() == Kind::Unsigned;
-  if (leftUnsigned == (b.kind() == Kind::Unsigned)) {
-    return a.unsignedValue() == b.unsignedValue();
-  }
+  if (leftUnsigned == (b.kind() == Kind::Unsigned)) return a.unsignedValue() == b.unsignedValue();
   const ValueView& plain = leftUnsigned ? b : a;
   return plain.signedValue() >= 0 && a.unsignedValue() == b.unsignedValue();
 }
 
 bool arraysEqual(const Array& a, const Array& b) noexcept {
-  if (a.size() != b.size()) {
-    return false;
-  }
+  if (a.size() != b.size()) return false;
   for (auto left = a.begin(), right = b.begin(); left != a.end(); ++left, ++right) {
-    if (!(*left == *right)) {
-      return false;
-    }
+    if (!(*left == *right)) return false;
   }
   return true;
 }
@@ -116,17 +106,13 @@ ValueView::ValueView(const Dictionary& dictionary) noexcept : body_(dictionary.b
 ValueView::ValueView(const Value& value) noexcept : ValueView(value.view()) {}
 
 Array ValueView::array() const noexcept {
-  if (kind_ != Kind::Array) {
-    return {};
-  }
+  if (kind_ != Kind::Array) return {};
   detail::retainBody(body_);
   return Array(body_);
 }
 
 Dictionary ValueView::dictionary() const noexcept {
-  if (kind_ != Kind::Dictionary) {
-    return {};
-  }
+  if (kind_ != Kind::Dictionary) return {};
   detail::retainBody(body_);
   return Dictionary(body_);
 }
@@ -203,12 +189,8 @@ std::string ValueView::asText() const {
 }
 
 bool operator==(const ValueView& a, const ValueView& b) noexcept {
-  if (a.isNumber() && b.isNumber()) {
-    return numbersEqual(a, b);
-  }
-  if (a.kind() != b.kind()) {
-    return false;
-  }
+  if (a.isNumber() && b.isNumber()) return numbersEqual(a, b);
+  if (a.kind() != b.kind()) return false;
   switch (a.kind()) {
     case Kind::Text:
       return a.text() == b.text();

@@ -64,7 +64,9 @@ std::size_t EventWriter::write(const EventBatch& batch, std::size_t from) {
 
 Outcome EventWriter::writeOnce(const EventBatch& batch, std::size_t from, std::size_t& written) {
   Outcome outcome = openOnce();
-  if (outcome == Outcome::Done) outcome = file_.begin();
+  if (outcome == Outcome::Done) {
+    outcome = file_.begin();
+  }
   const SteadyClock::time_point start = SteadyClock::now();
   const std::size_t most = transactionBytes(options_);
   std::size_t bytes = 0;
@@ -76,11 +78,19 @@ Outcome EventWriter::writeOnce(const EventBatch& batch, std::size_t from, std::s
     plist::appendJson(detailText_, event.detail);
     outcome = file_.append({event.time, event.backend, batch.name(event), payload, detailText_});
     bytes += event.nameSize + payload.size() + detailText_.size() + sizeof(double) * 2;
-    if (next % kEventsBetweenLooks == 0 && SteadyClock::now() - start > kInsertTime) bytes = most;
+    if (next % kEventsBetweenLooks == 0 && SteadyClock::now() - start > kInsertTime) {
+      bytes = most;
+    }
   }
-  if (outcome == Outcome::Done) outcome = file_.expire(SteadyClock::now() + kExpireTime);
-  if (outcome == Outcome::Done) outcome = file_.commit();
-  if (outcome == Outcome::Done) written = next - from;
+  if (outcome == Outcome::Done) {
+    outcome = file_.expire(SteadyClock::now() + kExpireTime);
+  }
+  if (outcome == Outcome::Done) {
+    outcome = file_.commit();
+  }
+  if (outcome == Outcome::Done) {
+    written = next - from;
+  }
   return outcome;
 }
 
@@ -122,9 +132,15 @@ bool EventWriter::maintain() {
 
 Outcome EventWriter::maintainOnce() {
   Outcome outcome = openOnce();
-  if (outcome == Outcome::Done) outcome = file_.begin();
-  if (outcome == Outcome::Done) outcome = file_.expire(SteadyClock::now() + kExpireTime);
-  if (outcome == Outcome::Done) outcome = file_.commit();
+  if (outcome == Outcome::Done) {
+    outcome = file_.begin();
+  }
+  if (outcome == Outcome::Done) {
+    outcome = file_.expire(SteadyClock::now() + kExpireTime);
+  }
+  if (outcome == Outcome::Done) {
+    outcome = file_.commit();
+  }
   return outcome;
 }
 

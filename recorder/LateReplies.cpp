@@ -13,7 +13,9 @@ void LateReplies::close() {
 }
 
 void LateReplies::enqueue(platform::Work reply) {
-  if (!queue_) queue_ = workQueues_.makeSerialQueue(manner_.queueName, platform::QualityOfService::Utility);
+  if (!queue_) {
+    queue_ = workQueues_.makeSerialQueue(manner_.queueName, platform::QualityOfService::Utility);
+  }
   line_->waiting.push_back(std::move(reply));
   const auto answer = [line = line_] { line->answerNext(); };
   if (manner_.delay == std::chrono::nanoseconds::zero()) {

@@ -51,7 +51,9 @@ class LateReplies {
   template <class Action>
   void ifOpen(Action action) {
     const platform::MutexLock lock(line_->mutex);
-    if (!line_->closed) action();
+    if (!line_->closed) {
+      action();
+    }
   }
   // Takes no more, destroys what waits and waits for the reply that is under way. Not to be called by a reply.
   void close();

@@ -53,7 +53,9 @@ void Recorder::record(std::string_view backend, std::string_view name, plist::Di
       ++failed_;
       refused = !std::exchange(refusalLogged_, true);
     } else {
-      if (incoming_.empty()) incomingSince_ = SteadyClock::now();
+      if (incoming_.empty()) {
+        incomingSince_ = SteadyClock::now();
+      }
       const std::size_t before = incoming_.bytes();
       waitingBytes_ += incoming_.add(backend, name, std::move(payload), std::move(detail), time);
       // While a group is gathered the writer looks by itself; it is called only to begin one, or for a large one.
@@ -64,8 +66,12 @@ void Recorder::record(std::string_view backend, std::string_view name, plist::Di
       }
     }
   }
-  if (wake) work_.notifyOne();
-  if (refused) log_.error("recorder is not running; the events handed over now are lost");
+  if (wake) {
+    work_.notifyOne();
+  }
+  if (refused) {
+    log_.error("recorder is not running; the events handed over now are lost");
+  }
 }
 
 RecorderCounters Recorder::counters() const {
@@ -113,7 +119,9 @@ void Recorder::run() {
         position_ = 0;
       }
       healthy = position_ < current_.size() ? writeCurrent() : maintain();
-      if (stopping_ && !healthy) --triesLeft;
+      if (stopping_ && !healthy) {
+        --triesLeft;
+      }
     }
     giveUp();
   }

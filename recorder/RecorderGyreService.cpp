@@ -6,7 +6,9 @@ namespace tarn::recorder {
 
 void RecorderGyreService::requestGyre(const platform::GyreRequest& request) {
   plist::Array options;
-  for (const std::int32_t option : request.options) options.append(option);
+  for (const std::int32_t option : request.options) {
+    options.append(option);
+  }
   const plist::Dictionary detail{{"subsystem", request.subsystem},
                                  {"reason", request.reason},
                                  {"application", request.applicationIdentifier},

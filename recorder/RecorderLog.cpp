@@ -22,9 +22,7 @@ void RecorderLog::notice(std::string_view text, int line) noexcept {
 }
 
 void RecorderLog::write(platform::LogLevel level, std::string_view text, int line) noexcept {
-  if (level < log_.threshold()) {
-    return;
-  }
+  if (level < log_.threshold()) return;
   std::string whole;
   platform::appendLogPrefix(whole, kModule, line);
   whole.append(text);

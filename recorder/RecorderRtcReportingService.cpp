@@ -28,12 +28,16 @@ class RecorderRtcReportingService::Completions {
   Completions(platform::WorkQueues& workQueues, const Behaviour& behaviour)
       : isLate_(behaviour.startDelay != std::chrono::milliseconds::zero()),
         late_(workQueues, {"sys.oxbow.tarnkit.recorder.rtc", kMostLate, behaviour.startDelay}) {
-    if (!behaviour.noBackends) backends_ = behaviour.backends;
+    if (!behaviour.noBackends) {
+      backends_ = behaviour.backends;
+    }
   }
 
   void add(platform::RtcReportingSession::StartCompletion completion) {
     platform::Work complete([this, completion = std::move(completion)]() mutable { completion(backends_); });
-    if (!isLate_ || !late_.add(std::move(complete))) complete();
+    if (!isLate_ || !late_.add(std::move(complete))) {
+      complete();
+    }
   }
   void close() { late_.close(); }
 
@@ -49,7 +53,9 @@ class RecorderRtcReportingService::Session final : public platform::RtcReporting
       : recorder_(recorder), clock_(clock), completions_(std::move(completions)), number_(number) {}
 
   void startConfiguration(StartCompletion completion) override {
-    if (const auto completions = completions_.lock()) completions->add(std::move(completion));
+    if (const auto completions = completions_.lock()) {
+      completions->add(std::move(completion));
+    }
   }
   SendResult sendMessage(std::uint16_t category, std::uint16_t type, const Dictionary& payload) override {
     const Dictionary::Entry detail[] = {{kSession, number_}, {kCategory, unsigned{category}}, {kType, unsigned{type}}};

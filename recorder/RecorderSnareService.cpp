@@ -23,8 +23,12 @@ std::string freshIdentifier(platform::RandomSource& randomSource) {
   constexpr std::array<std::size_t, 5> kGroups{8, 4, 4, 4, 12};
   std::string identifier;
   for (const std::size_t group : kGroups) {
-    if (!identifier.empty()) identifier += '-';
-    for (std::size_t i = 0; i < group; ++i) identifier += kDigits[randomSource.below(kDigits.size())];
+    if (!identifier.empty()) {
+      identifier += '-';
+    }
+    for (std::size_t i = 0; i < group; ++i) {
+      identifier += kDigits[randomSource.below(kDigits.size())];
+    }
   }
   return identifier;
 }
@@ -87,8 +91,12 @@ class RecorderSnareService::Reporter final : public platform::SnareReporter {
                            {Keys::kType, signature.type},
                            {Keys::kSubType, signature.subType},
                            {Keys::kSubTypeContext, signature.subTypeContext}};
-    if (signature.detectedProcess) made.set(Keys::kDetectedProcess, *signature.detectedProcess);
-    if (signature.triggerThresholdValues) made.set(Keys::kTriggerThresholdValues, *signature.triggerThresholdValues);
+    if (signature.detectedProcess) {
+      made.set(Keys::kDetectedProcess, *signature.detectedProcess);
+    }
+    if (signature.triggerThresholdValues) {
+      made.set(Keys::kTriggerThresholdValues, *signature.triggerThresholdValues);
+    }
     return made;
   }
 

@@ -24,7 +24,9 @@ bool RecorderTallyService::eventIsInUse(std::string_view name) {
   if (all_ || inUse_.empty()) return all_;
   if (name.size() > kLongestRememberedName) return matchesAny(name);
   if (const auto known = remembered_.find(name); known != remembered_.end()) return known->second;
-  if (remembered_.size() >= kRememberedNames) remembered_.clear();
+  if (remembered_.size() >= kRememberedNames) {
+    remembered_.clear();
+  }
   return remembered_.emplace(name, matchesAny(name)).first->second;
 }
 

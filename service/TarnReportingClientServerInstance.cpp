@@ -67,9 +67,7 @@ void sendHeldReply(TarnReportingSession& session) {
 }
 
 plist::ValueView textOf(const platform::ReporterIDs& reporterIDs, plist::Array& storage) {
-  if (!reporterIDs) {
-    return {};
-  }
+  if (!reporterIDs) return {};
   for (const std::int64_t reporterID : *reporterIDs) {
     storage.append(reporterID);
   }
@@ -78,9 +76,7 @@ plist::ValueView textOf(const platform::ReporterIDs& reporterIDs, plist::Array& 
 
 // What became of a record that so many workers got.
 TarnReportingOutcome outcomeOf(const TarnReportingSessionMessage& record, std::size_t workers) {
-  if (record.isRedundant()) {
-    return TarnReportingOutcome::Redundant;
-  }
+  if (record.isRedundant()) return TarnReportingOutcome::Redundant;
   return workers != 0 ? TarnReportingOutcome::Delivered : TarnReportingOutcome::Unwanted;
 }
 
@@ -295,9 +291,7 @@ void TarnReportingClientServerInstance::storeSession(std::int64_t reporterID,
 
 void TarnReportingClientServerInstance::removeSession(std::int64_t reporterID) {
   const auto session = sessions_.find(reporterID);
-  if (session == nullptr) {
-    return;
-  }
+  if (session == nullptr) return;
   const std::size_t running = sessions_.runningCount();
   sessions_.remove(reporterID);
   if (index_ != nullptr) {
@@ -374,9 +368,7 @@ void TarnReportingClientServerInstance::start(std::int64_t reporterID, platform:
 void TarnReportingClientServerInstance::stop(std::int64_t reporterID) {
   kLog(LogLevel::Default, "stopping session for reporter %lli", reporterID);
   trace(kTraceStop, reporterID);
-  if (reporterID == 0) {
-    return;
-  }
+  if (reporterID == 0) return;
   const auto session = findReportingSessionForID(reporterID, false);
   if (session && session->started()) {
     stopSession(*session);
@@ -420,9 +412,7 @@ void TarnReportingClientServerInstance::beginToSend(Delivery& delivery) {
 
 void TarnReportingClientServerInstance::goOnSending(Delivery& delivery) {
   const auto service = delegate_.lock();
-  if (!service) {
-    return;
-  }
+  if (!service) return;
   const auto giveWay = [&] {
     delivery.gaveWay = delivery.found;
     goOnLater([self = shared_from_this(), delivery = std::move(delivery)]() mutable { self->goOnSending(delivery); });
@@ -481,15 +471,11 @@ void TarnReportingClientServerInstance::goOnListing(Listing& listing) {
 
 void TarnReportingClientServerInstance::endClient() {
   const auto service = delegate_.lock();
-  if (!service) {
-    return;
-  }
+  if (!service) return;
   const auto& clients = service->getAllClients();
   const bool isListed =
       std::any_of(clients.begin(), clients.end(), [&](const auto& client) { return client.get() == this; });
-  if (!isListed) {
-    return;
-  }
+  if (!isListed) return;
   const auto goOn = [self = shared_from_this()] { self->endClient(); };
   while (const auto session = sessions_.firstRunning()) {
     stopSession(*session);

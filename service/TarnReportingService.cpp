@@ -43,9 +43,7 @@ class SessionTexts {
     const std::size_t most = count <= kMostListed ? count : kMostListed - 1;
     plist::Array texts;
     forEach([&](const std::shared_ptr<TarnReportingSession>& session) {
-      if (texts.size() == most) {
-        return false;
-      }
+      if (texts.size() == most) return false;
       const std::string text = session->description();
       if (text.size() > bytesLeft_) {
         bytesLeft_ = 0;
@@ -107,14 +105,14 @@ bool TarnReportingService::listenerShouldAcceptNewConnection(const std::shared_p
   kLog(LogLevel::Default, "newConnection: %@", [&] { return connection->description(); });
   std::shared_ptr<TarnReportingClientServerInstance> client;
   {
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     client = TarnReportingClientServerInstance::initWithPID(processIdentifier, weak_from_this());
     connection->setExportedObject(client);
   }
   TarnReportingUtilityGetReportingServerQueue()->async([self = shared_from_this(), client, processIdentifier] {
     client->setClientStartDate(TarnReportingFacilities().clock.epochSeconds());
     client->setClientProcessName(TarnReportingFacilities().processFacts.processName(processIdentifier).value_or(""));
-    const std::lock_guard lock(self->mutex_);
+    const MutexLock lock(self->mutex_);
     client->setSessionIndex(self->index_, self->nextClientNumber_++);
     self->clients_.push_back(client);
   });
@@ -136,9 +134,7 @@ bool TarnReportingService::listenerShouldAcceptNewConnection(const std::shared_p
 
 void TarnReportingService::handleInvalidation(const std::weak_ptr<TarnReportingClientServerInstance>& weakClient) {
   const std::shared_ptr<TarnReportingClientServerInstance> client = weakClient.lock();
-  if (!client) {
-    return;
-  }
+  if (!client) return;
   client->handleConnectionError();
   const std::int64_t uptime = uptimeOf(*client);
   const std::string& name = client->clientProcessName();
@@ -177,28 +173,24 @@ void TarnReportingService::logSessionsOfClients() const {
       return texts.of(sessions.runningCount(), [&](auto visit) { sessions.forEachRunning(visit); });
     });
   };
-  if (clients_.size() <= kMostListed) {
-    for (const auto& client : clients_) {
+  if (getAllClients().size() <= kMostListed) {
+    for (const auto& client : getAllClients()) {
       logClient(*client);
     }
     return;
   }
   std::size_t listed = 0;
   for (const auto& [number, client] : index_->clients()) {
-    if (listed == kMostListed || texts.exhausted()) {
-      break;
-    }
+    if (listed == kMostListed || texts.exhausted()) break;
     logClient(*client);
     ++listed;
   }
-  kLog(LogLevel::Default, "sessions of %ld more clients are not listed", clients_.size() - listed);
+  kLog(LogLevel::Default, "sessions of %ld more clients are not listed", getAllClients().size() - listed);
 }
 
 std::shared_ptr<TarnReportingSession> TarnReportingService::findReportingSessionForID(std::int64_t reporterID) {
-  const std::lock_guard lock(mutex_);
-  if (reporterID == 0 || !isReportingEnabled()) {
-    return nullptr;
-  }
+  const MutexLock lock(mutex_);
+  if (reporterID == 0 || !isReportingEnabled()) return nullptr;
   auto session = lookUp(reporterID);
   if (!session) {
     kLog(LogLevel::Error, "failed to find reporting session %lli", reporterID);
@@ -208,9 +200,7 @@ std::shared_ptr<TarnReportingSession> TarnReportingService::findReportingSession
 
 std::shared_ptr<TarnReportingSession> TarnReportingService::lookUp(std::int64_t reporterID) const {
   const auto* const client = index_->firstHolder(reporterID);
-  if (client == nullptr) {
-    return nullptr;
-  }
+  if (client == nullptr) return nullptr;
   kLog(LogLevel::Info, "found reporting session %lli for client %i", reporterID, client->processIdentifier());
   return client->clientReportingSessionMap().find(reporterID);
 }
@@ -247,10 +237,8 @@ bool TarnReportingService::findNextSessions(SessionSearch& search) {
 }
 
 void TarnReportingService::findListed(SessionSearch& search, std::int64_t reporterID) {
-  const std::lock_guard lock(mutex_);
-  if (reporterID == 0 || !isReportingEnabled()) {
-    return;
-  }
+  const MutexLock lock(mutex_);
+  if (reporterID == 0 || !isReportingEnabled()) return;
   if (auto session = lookUp(reporterID)) {
     search.found.push_back(std::move(session));
   } else if (++search.unknown <= kMostUnknownListed) {
@@ -259,7 +247,7 @@ void TarnReportingService::findListed(SessionSearch& search, std::int64_t report
 }
 
 void TarnReportingService::removeClient(const TarnReportingClientServerInstance& client) {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   const auto found =
       std::find_if(clients_.begin(), clients_.end(), [&](const auto& listed) { return listed.get() == &client; });
   if (found != clients_.end()) {
@@ -281,7 +269,7 @@ void TarnReportingService::logReportingSessions() {
 }
 
 std::size_t TarnReportingService::sessionCount() const {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   return index_->sessionCount() + (singleMessageSession_ ? 1 : 0);
 }
 

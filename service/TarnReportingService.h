@@ -10,9 +10,9 @@
 #include <atomic>
 #include <chrono>
 #include <memory>
-#include <mutex>
 
 #include "platform/Listener.h"
+#include "plist/ThreadSafety.h"
 #include "service/TarnReportingServiceDelegateProtocol.h"
 #include "service/TarnReportingSessionIndex.h"
 
@@ -37,11 +37,12 @@ class TarnReportingService : public TarnReportingServiceDelegateProtocol,
   // Always takes the connection, gives it a client instance and resumes it.
   bool listenerShouldAcceptNewConnection(const std::shared_ptr<platform::Connection>& connection) override;
 
-  const Clients& getAllClients() const override { return clients_; }
+  // On the server queue, without the lock: nobody else changes the list.
+  const Clients& getAllClients() const override TARN_UNCHECKED { return clients_; }
   bool isReportingEnabled() const override { return reportingEnabled_.load(); }
   Sessions getAllActiveReportingSessions() override;
   std::shared_ptr<TarnReportingSession> findReportingSessionForID(std::int64_t reporterID) override;
-  // A list with IDs: every session found for them, 0 passed over. No list or an empty one: every running session of
+  // A list with IDs: every session found for them, 0 skipped. No list or an empty one: every running session of
   // every client; when none runs, the single-message session, made and started when there is none.
   Sessions findReportingSessionsForIDs(const platform::ReporterIDs& reporterIDs) override;
   bool findNextSessions(SessionSearch& search) override;
@@ -67,8 +68,8 @@ class TarnReportingService : public TarnReportingServiceDelegateProtocol,
 
   std::atomic<bool> reportingEnabled_{true};
 
-  mutable std::recursive_mutex mutex_;
-  Clients clients_;  // changed on the server queue, under the lock
+  mutable RecursiveMutex mutex_;
+  Clients clients_ TARN_GUARDED_BY(mutex_);  // changed on the server queue alone
   const std::shared_ptr<TarnReportingSessionIndex> index_;
 
   // Server queue only.

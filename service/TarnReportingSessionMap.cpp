@@ -29,9 +29,7 @@ void TarnReportingSessionMap::remove(std::int64_t reporterID) {
 
 void TarnReportingSessionMap::setRunning(std::int64_t reporterID, bool running) {
   const auto place = places_.find(reporterID);
-  if (place == places_.end()) {
-    return;
-  }
+  if (place == places_.end()) return;
   if (running) {
     running_.emplace(place->second, &ordered_.at(place->second));
   } else {

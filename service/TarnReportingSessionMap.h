@@ -48,9 +48,7 @@ class TarnReportingSessionMap {
   template <class Visit>
   bool forEachRunning(Visit&& visit) const {
     for (const auto& [place, entry] : running_) {
-      if (!visit(entry->session)) {
-        return false;
-      }
+      if (!visit(entry->session)) return false;
     }
     return true;
   }
@@ -60,9 +58,7 @@ class TarnReportingSessionMap {
   bool forEachFrom(Place& from, Visit&& visit) const {
     for (auto entry = ordered_.lower_bound(from); entry != ordered_.end(); ++entry) {
       from = entry->first + 1;
-      if (!visit(entry->second.reporterID)) {
-        return false;
-      }
+      if (!visit(entry->second.reporterID)) return false;
     }
     return true;
   }

@@ -2,10 +2,10 @@
 //
 // The process ends without tearing the parts down: what the back-ends hold is committed, then it exits at once.
 // Sessions are not stopped.
+#include <cstdint>
 #include <cstdlib>
 #include <iostream>
 #include <memory>
-#include <optional>
 #include <string>
 #include <utility>
 
@@ -30,9 +30,9 @@ using namespace linux_host;
 constexpr std::string_view kModule = "main";
 
 // One line for whoever started the service.
-int refuse(const Refusal& refusal) {
-  std::cerr << "tarnreportingd: " << refusal.complaint << '\n';
-  return refusal.exitStatus;
+int refuse(const std::string& complaint, std::int64_t exitStatus = kExitFailure) {
+  std::cerr << "tarnreportingd: " << complaint << '\n';
+  return static_cast<int>(exitStatus);
 }
 
 std::shared_ptr<TarnReportingService> makeService(platform::Log& log) {
@@ -61,19 +61,14 @@ ServiceCounts countsOf(const TarnReportingService& service) {
 // Serves until a signal; the exit status.
 int serve(LinuxPlatform& platform, HostSetup& setup) {
   MainLoop& loop = platform.loop();
-  if (std::string error = platform.start(); !error.empty()) {
-    return refuse({std::move(error)});
-  }
-  if (std::string error = SignalSource::start(setup.signals, loop, [&loop](int) { loop.stop(); }); !error.empty()) {
-    return refuse({std::move(error)});
-  }
+  if (const Status started = platform.start(); started.failed()) return refuse(started->text);
+  const Status heard = SignalSource::start(setup.signals, loop, [&loop](int) { loop.stop(); });
+  if (heard.failed()) return refuse(heard->text);
   TarnReportingInstallFacilities(&platform.facilities());
   const std::shared_ptr<TarnReportingService> service = makeService(*setup.log);
   // Only now is there anything to connect to: who can reach the service finds it whole, its notifications heard.
-  if (std::string error = platform.listen(std::move(setup.socket), service, [&service] { return countsOf(*service); });
-      !error.empty()) {
-    return refuse({std::move(error)});
-  }
+  const Status listening = platform.listen(std::move(setup.socket), service, [&service] { return countsOf(*service); });
+  if (listening.failed()) return refuse(listening->text);
   platform.serve();
   return kExitSuccess;
 }
@@ -85,13 +80,11 @@ int main(int argumentCount, char** arguments) {
   using namespace tarn;
   const ServiceCommand command = parseServiceCommand(argumentCount, arguments, HostEnvironment::current());
   std::cout << command.output << std::flush;
-  std::cerr << command.complaint;
-  if (!command.options) {
-    return command.exitStatus;
-  }
+  if (command.usage.failed()) return refuse(command.usage->text, command.usage->code);
+  if (!command.options) return kExitSuccess;
   HostSetup setup;
-  if (const std::optional<Refusal> refusal = setup.prepare(*command.options)) {
-    return refuse(*refusal);
+  if (const Status prepared = setup.prepare(*command.options); prepared.failed()) {
+    return refuse(prepared->text, prepared->code);
   }
   ServiceManager serviceManager;
   LinuxPlatform platform(setup.configuration, command.options->stateDirectory, setup.deviceProperties,

@@ -88,9 +88,7 @@ void TarnReportingSession::setServiceType(AudioServiceType serviceType) {
 void TarnReportingSession::updateConfigurationWithContentsOfConfiguration(const plist::Dictionary* configuration) {
   TarnReportingRequireServerQueue();
   static const plist::Key kMirrored("KvHostApplicationDisplayID");
-  if (configuration == nullptr) {
-    return;
-  }
+  if (configuration == nullptr) return;
   configuration_.set(keys::kHostApplicationDisplayID, configuration->get(kMirrored));
   configuration_.merge(*configuration);
 }
@@ -111,9 +109,7 @@ void TarnReportingSession::start() {
 void TarnReportingSession::stop() {
   appendMarker(AudioEventType::Stop, "stop");
   kLog(LogLevel::Debug, "stop called. reporterID=%lli", reporterID_);
-  if (!started_) {
-    return;
-  }
+  if (!started_) return;
   kLog(LogLevel::Debug, "ending session. reporterID=%lli", reporterID_);
   trace(kTraceStopped, reporterID_);
   log_.sort();

@@ -1,7 +1,6 @@
 // The intake of TarnReportingSession: what happens to a message before any worker sees it, and to whom it goes.
 #include <array>
 #include <cassert>
-#include <mutex>
 #include <unordered_map>
 
 #include "platform/Clock.h"
@@ -78,9 +77,7 @@ void TarnReportingSession::addMissingDates(TarnReportingSessionMessage& message)
 
 void TarnReportingSession::removeWhiteSpaceFromKeys(TarnReportingSessionMessage& message) {
   plist::Dictionary& payload = message.mutableMessage();
-  if (!payload.hasKeyWithBlank()) {
-    return;
-  }
+  if (!payload.hasKeyWithBlank()) return;
   // Later entries win over earlier ones of the same new name, and all of them over a key that had no blank.
   std::vector<plist::Key> names;
   names.reserve(payload.size());
@@ -93,9 +90,7 @@ void TarnReportingSession::removeWhiteSpaceFromKeys(TarnReportingSessionMessage&
     }
   }
   for (const plist::Dictionary::Entry& entry : payload) {
-    if (!entry.key.hasBlank()) {
-      continue;
-    }
+    if (!entry.key.hasBlank()) continue;
     names.emplace_back(withoutBlanks(entry.key.text()));
     const auto [place, isNew] = places.emplace(names.back(), entries.size());
     if (isNew) {
@@ -114,24 +109,18 @@ void TarnReportingSession::addAudioMessageTag(TarnReportingSessionMessage& messa
 }
 
 void TarnReportingSession::addAppName(TarnReportingSessionMessage& message) const {
-  const std::lock_guard guard(message);
+  const MutexLock guard(message);
   plist::Dictionary& payload = message.mutableMessage();
   const plist::ValueView present = payload.get(keys::kHostApplicationDisplayID);
-  if (present && !(present == plist::ValueView("Unknown"))) {
-    return;
-  }
+  if (present && !(present == plist::ValueView("Unknown"))) return;
   payload.set(keys::kHostApplicationDisplayID, TarnReportingUtilityRetrieveAppName(configuration_));
 }
 
 bool TarnReportingSession::messageIsRedundant(const TarnReportingSessionMessage& message) const {
   static const std::array<plist::Key, 3> kIgnored{keys::kProcessUptime, keys::kSystemUptime, keys::kTimestamp};
-  if (message.type() == AudioEventType::Error || message.category() == AudioEventCategory::Error) {
-    return false;
-  }
+  if (message.type() == AudioEventType::Error || message.category() == AudioEventCategory::Error) return false;
   const TarnReportingSessionMessage* const earlier = log_.newest(message.category(), message.type());
-  if (earlier == nullptr || !message.message().equalsIgnoring(earlier->message(), kIgnored)) {
-    return false;
-  }
+  if (earlier == nullptr || !message.message().equalsIgnoring(earlier->message(), kIgnored)) return false;
   kLog(LogLevel::Debug, "marking event redundant");
   return true;
 }

@@ -53,9 +53,7 @@ void TarnReportingSessionMessage::sortMessages(TarnReportingSessionMessages& mes
   for (const auto& message : messages) {
     times.push_back(sortingTime(*message));
   }
-  if (std::is_sorted(times.begin(), times.end())) {
-    return;
-  }
+  if (std::is_sorted(times.begin(), times.end())) return;
   std::vector<std::uint32_t> order(messages.size());
   std::iota(order.begin(), order.end(), 0U);
   std::stable_sort(order.begin(), order.end(),

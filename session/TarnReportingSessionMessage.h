@@ -15,6 +15,7 @@
 #include <vector>
 
 #include "plist/Dictionary.h"
+#include "plist/ThreadSafety.h"
 #include "service/vocabulary/TarnReportingVocabulary.h"
 
 namespace tarn {
@@ -23,9 +24,9 @@ class TarnReportingSessionMessage;
 
 using TarnReportingSessionMessages = std::deque<std::shared_ptr<TarnReportingSessionMessage>>;
 
-class TarnReportingSessionMessage {
+class TARN_CAPABILITY TarnReportingSessionMessage {
  public:
-  // Names of worker classes; the texts live for ever.
+  // Names of worker classes; the texts are static.
   using DestinationWorkers = std::vector<std::string_view>;
 
   TarnReportingSessionMessage(plist::Dictionary message, AudioEventCategory category, AudioEventType type)
@@ -60,8 +61,8 @@ class TarnReportingSessionMessage {
   static void sortMessages(TarnReportingSessionMessages& messages);
 
   // The record's own guard (BasicLockable), for changes to a record that a worker may still hold.
-  void lock() const noexcept;
-  void unlock() const noexcept;
+  void lock() const noexcept TARN_ACQUIRE();
+  void unlock() const noexcept TARN_RELEASE();
 
  private:
   plist::Dictionary message_;

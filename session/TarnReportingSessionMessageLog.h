@@ -1,9 +1,9 @@
-// TarnReportingSessionMessageLog: the records of a session since its start, in order, and the look-up behind the
+// TarnReportingSessionMessageLog: the records of a session since its start, in order, and the look-up for the
 // redundancy rule.
 //
 // The rule is defined by a walk from the newest record to the oldest for one of the same category and type. The log
 // keeps the answer of that walk for every pair of category and type, so that a look-up costs the same in a long session
-// as in a short one. A sort changes what the walk would find: the answers are then made anew by one pass.
+// as in a short one. A sort changes what the walk would find: the answers are then computed again in one pass.
 //
 // Owner: the session. Threads: the server queue.
 #pragma once

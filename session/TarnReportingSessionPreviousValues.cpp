@@ -48,9 +48,7 @@ void TarnReportingSessionPreviousValues::merge(const TarnReportingSessionPreviou
 
 plist::ValueView TarnReportingSessionPreviousValues::get(const plist::Key& key) const noexcept {
   for (auto payload = recent_.rbegin(); payload != recent_.rend(); ++payload) {
-    if (const plist::ValueView value = payload->get(key)) {
-      return value;
-    }
+    if (const plist::ValueView value = payload->get(key)) return value;
   }
   const auto found = older_.find(key);
   return found == older_.end() ? plist::ValueView() : found->second.view();

@@ -35,11 +35,11 @@ void addMachineFacts(plist::Dictionary& summary) {
   const platform::ProcessFacts& facts = TarnReportingFacilities().processFacts;
   summary.set("thermal_state", thermalStateName(facts.thermalState()));
   summary.set("low_power_enabled", facts.lowPowerModeEnabled());
-  const platform::ProcessFacts::Footprint footprint = facts.physicalFootprint();
-  if (footprint.bytes) {
-    summary.set("vmInfo_phys_footprint_MiB", *footprint.bytes >> 20U);
+  const Result<std::uint64_t> footprint = facts.physicalFootprint();
+  if (footprint.ok()) {
+    summary.set("vmInfo_phys_footprint_MiB", footprint.value >> 20U);
   } else {
-    kLog(LogLevel::Error, "Error with task_info(): %s", footprint.error);
+    kLog(LogLevel::Error, "Error with task_info(): %s", footprint.error->text);
   }
   const platform::LoadAverages load = facts.loadAverages();
   summary.set("load_avg_1_min", load.oneMinute);
@@ -71,9 +71,7 @@ void TarnReportingSessionSummaryWorker::handleMessage(const std::shared_ptr<Tarn
 
 void TarnReportingSessionSummaryWorker::stop() {
   const std::shared_ptr<TarnReportingSession> owner = session();
-  if (!owner) {
-    return;
-  }
+  if (!owner) return;
   owner->sendMessage(std::make_shared<TarnReportingSessionMessage>(summary(*owner), AudioEventCategory::SessionGeneric,
                                                                    AudioEventType::Summary));
 }

@@ -17,9 +17,7 @@ const TarnReportingSessionTallyWorker::EventNames& TarnReportingSessionTallyWork
   const std::uint64_t key = std::uint64_t{static_cast<std::uint32_t>(category)} << 32U |
                             std::uint64_t{static_cast<std::uint16_t>(type)} << 16U |
                             static_cast<std::uint16_t>(serviceType);
-  if (const auto found = names_.find(key); found != names_.end()) {
-    return found->second;
-  }
+  if (const auto found = names_.find(key); found != names_.end()) return found->second;
   if (names_.size() == kNamesLimit) {
     names_.clear();
   }
@@ -32,9 +30,7 @@ const TarnReportingSessionTallyWorker::EventNames& TarnReportingSessionTallyWork
 
 void TarnReportingSessionTallyWorker::handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) {
   const std::shared_ptr<TarnReportingSession> owner = session();
-  if (!owner) {
-    return;
-  }
+  if (!owner) return;
   platform::TallyService& tally = TarnReportingFacilities().tally;
   const EventNames& names = namesFor(owner->serviceType(), message->category(), message->type());
   for (const std::string* name : {&names.ofMessage, &names.ofService}) {

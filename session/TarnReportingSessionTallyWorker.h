@@ -35,7 +35,7 @@ class TarnReportingSessionTallyWorker : public TarnReportingSessionWorkerProtoco
   };
   const EventNames& namesFor(AudioServiceType serviceType, AudioEventCategory category, AudioEventType type);
 
-  // The names of the few kinds of messages that a session sees over and over; begun anew when a client floods it.
+  // The names of the few kinds of messages that a session sees over and over; cleared when a client floods it.
   static constexpr std::size_t kNamesLimit = 256;
   std::unordered_map<std::uint64_t, EventNames> names_;
 };

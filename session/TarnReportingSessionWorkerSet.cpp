@@ -41,9 +41,7 @@ TarnReportingSignpost call(const Member& member, std::string_view verb, std::int
 }
 
 bool wants(const Member& member, const TarnReportingSessionMessage& message) {
-  if (member.consumer == nullptr || !member.worker->started()) {
-    return false;
-  }
+  if (member.consumer == nullptr || !member.worker->started()) return false;
   if (message.isRedundant() && (member.workerClass->handleRedundantMessages == nullptr ||
                                 !member.workerClass->handleRedundantMessages(*member.worker))) {
     return false;
@@ -100,9 +98,7 @@ bool TarnReportingSessionWorkerSet::holds(const Class& workerClass) const noexce
 
 void TarnReportingSessionWorkerSet::startWorkers(std::int64_t reporterID) {
   inTurns(messageWorkers_, turnToStart, [reporterID](const Member& member) {
-    if (member.worker->started()) {
-      return;
-    }
+    if (member.worker->started()) return;
     if (member.workerClass->start == nullptr) {
       member.worker->setStarted(true);
       return;
@@ -118,9 +114,7 @@ void TarnReportingSessionWorkerSet::startWorkers(std::int64_t reporterID) {
 
 void TarnReportingSessionWorkerSet::stopWorkers(std::int64_t reporterID) {
   inTurns(messageWorkers_, turnToStop, [reporterID](const Member& member) {
-    if (!member.worker->started()) {
-      return;
-    }
+    if (!member.worker->started()) return;
     if (member.workerClass->stop != nullptr) {
       const TarnReportingSignpost signpost = call(member, "stop", reporterID);
       member.workerClass->stop(*member.worker);

@@ -1,7 +1,6 @@
 #include "session/TarnReportingSessionWorkerUtility.h"
 
 #include <algorithm>
-#include <mutex>
 #include <vector>
 
 #include "session/TarnReportingSessionKeys.h"
@@ -37,7 +36,7 @@ TarnReportingSessionMessages TarnReportingSessionWorkerUtility::combineRapidMess
     }
     seen[place] = true;
     if (head != nullptr && timeOf(*message) - timeOf(*head) < maximumPausetime) {
-      const std::lock_guard guard(*head);
+      const MutexLock guard(*head);
       head->mutableMessage().merge(message->message());
       continue;
     }

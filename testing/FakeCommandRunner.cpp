@@ -44,8 +44,8 @@ class FakeCommandRunner::Running final : public platform::RunningCommand {
 FakeCommandRunner::FakeCommandRunner() : ledger_(std::make_shared<Ledger>()) {}
 FakeCommandRunner::~FakeCommandRunner() = default;
 
-platform::Outcome<std::unique_ptr<platform::RunningCommand>> FakeCommandRunner::start(
-    std::string_view commandText, std::chrono::nanoseconds timeLimit) {
+Result<std::unique_ptr<platform::RunningCommand>> FakeCommandRunner::start(std::string_view commandText,
+                                                                           std::chrono::nanoseconds timeLimit) {
   ledger_->happened("run", commandText);
   const std::lock_guard lock(ledger_->mutex);
   const auto found = ledger_->tools.find(commandText);
@@ -55,7 +55,7 @@ platform::Outcome<std::unique_ptr<platform::RunningCommand>> FakeCommandRunner::
   } else {
     tool.end.status = platform::CommandEnd::kNotFound;
   }
-  if (tool.refusal) return {nullptr, tool.refusal};
+  if (tool.refusal.failed()) return {nullptr, tool.refusal};
   ledger_->runs.push_back({std::string(commandText), timeLimit, false});
   return {std::make_unique<Running>(ledger_, ledger_->runs.size() - 1, std::move(tool)), {}};
 }

@@ -23,7 +23,7 @@ class FakeCommandRunner final : public platform::CommandRunner {
   struct Tool {
     std::string output;
     platform::CommandEnd end;
-    platform::MaybeError refusal;  // the command can't be started at all
+    Status refusal;  // the command can't be started at all
   };
   struct Run {
     std::string commandText;
@@ -37,8 +37,8 @@ class FakeCommandRunner final : public platform::CommandRunner {
   FakeCommandRunner& operator=(const FakeCommandRunner&) = delete;
 
   // The interface.
-  platform::Outcome<std::unique_ptr<platform::RunningCommand>> start(std::string_view commandText,
-                                                                     std::chrono::nanoseconds timeLimit) override;
+  Result<std::unique_ptr<platform::RunningCommand>> start(std::string_view commandText,
+                                                          std::chrono::nanoseconds timeLimit) override;
 
   // Controls.
   void recordOrderIn(OrderRecord& record);

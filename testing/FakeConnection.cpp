@@ -31,9 +31,7 @@ void FakeConnection::interrupt() {
 
 void FakeConnection::invalidate() {
   const auto self = weak_from_this().lock();
-  if (std::exchange(invalidated_, true)) {
-    return;
-  }
+  if (std::exchange(invalidated_, true)) return;
   if (Handler handler = std::move(invalidationHandler_)) {
     handler();
   }

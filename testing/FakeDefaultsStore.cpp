@@ -17,9 +17,7 @@ plist::Value FakeDefaultsStore::preference(std::string_view key, std::string_vie
 bool FakeDefaultsStore::setValue(std::string_view suite, std::string_view key, const plist::ValueView& value) {
   happened("store", key);
   const std::lock_guard lock(mutex_);
-  if (writesFail_) {
-    return false;
-  }
+  if (writesFail_) return false;
   store(suite, key, value);
   writes_.push_back({std::string(suite), std::string(key), plist::Value(value)});
   return true;
@@ -52,9 +50,7 @@ std::vector<FakeDefaultsStore::Write> FakeDefaultsStore::writes() const {
 
 plist::Value FakeDefaultsStore::find(std::string_view suite, std::string_view key) const {
   const auto foundSuite = suites_.find(suite);
-  if (readsFail_ || foundSuite == suites_.end()) {
-    return {};
-  }
+  if (readsFail_ || foundSuite == suites_.end()) return {};
   const auto found = foundSuite->second.find(key);
   return found == foundSuite->second.end() ? plist::Value() : found->second;
 }

@@ -6,28 +6,25 @@
 
 namespace tarn::testing {
 
-using platform::MaybeError;
-using platform::PlatformError;
-
 namespace {
 
 // The numbers and texts that Linux has for these.
-PlatformError noSuchFile() {
+Error noSuchFile() {
   return {2, "No such file or directory"};
 }
-PlatformError badDescriptor() {
+Error badDescriptor() {
   return {9, "Bad file descriptor"};
 }
-PlatformError fileExists() {
+Error fileExists() {
   return {17, "File exists"};
 }
-PlatformError notADirectory() {
+Error notADirectory() {
   return {20, "Not a directory"};
 }
-PlatformError fileTooLarge() {
+Error fileTooLarge() {
   return {27, "File too large"};
 }
-PlatformError noSpace() {
+Error noSpace() {
   return {28, "No space left on device"};
 }
 
@@ -40,11 +37,11 @@ std::string parentOf(std::string_view path) {
 
 struct FakeFileSystem::Disk {
   struct Order {
-    PlatformError error;
+    Error error;
     std::size_t skip = 0;
   };
 
-  MaybeError ordered(Operation operation) {
+  Status ordered(Operation operation) {
     const auto found = orders.find(operation);
     if (found == orders.end()) return {};
     if (found->second.skip > 0) {
@@ -54,10 +51,10 @@ struct FakeFileSystem::Disk {
     return orders.extract(found).mapped().error;
   }
 
-  MaybeError makeDirectories(const std::string& path, std::uint32_t permissions) {
+  Status makeDirectories(const std::string& path, std::uint32_t permissions) {
     if (directories.contains(path)) return {};
     if (files.contains(path)) return notADirectory();
-    if (auto error = makeDirectories(parentOf(path), permissions)) return error;
+    if (auto error = makeDirectories(parentOf(path), permissions); error.failed()) return error;
     directories.emplace(path, permissions);
     return {};
   }
@@ -85,17 +82,19 @@ class FakeFileSystem::OpenFile final : public platform::WritableFile {
   OpenFile(const OpenFile&) = delete;
   OpenFile& operator=(const OpenFile&) = delete;
 
-  MaybeError write(std::string_view bytes) override {
+  Status write(std::string_view bytes) override {
     const std::lock_guard lock(disk_->mutex);
     if (content_ == nullptr) return badDescriptor();
-    if (auto error = disk_->ordered(Operation::Write)) return error;
+    if (auto error = disk_->ordered(Operation::Write); error.failed()) return error;
     const auto fitting = std::min(bytes.size(), disk_->freeBytes.value_or(bytes.size()));
     content_->append(bytes.substr(0, fitting));
-    if (disk_->freeBytes) *disk_->freeBytes -= fitting;
-    return fitting == bytes.size() ? MaybeError() : noSpace();
+    if (disk_->freeBytes) {
+      *disk_->freeBytes -= fitting;
+    }
+    return fitting == bytes.size() ? Status() : noSpace();
   }
 
-  MaybeError close() override {
+  Status close() override {
     const std::lock_guard lock(disk_->mutex);
     if (content_ == nullptr) return badDescriptor();
     content_.reset();
@@ -115,33 +114,33 @@ std::string FakeFileSystem::wellKnownDirectory(platform::WellKnownDirectory whic
   return which == platform::WellKnownDirectory::DiagnosticLogs ? "/device/DiagnosticLogs" : "/device/tmp";
 }
 
-MaybeError FakeFileSystem::createDirectories(std::string_view path, std::uint32_t permissions) {
+Status FakeFileSystem::createDirectories(std::string_view path, std::uint32_t permissions) {
   const std::lock_guard lock(disk_->mutex);
-  if (auto error = disk_->ordered(Operation::CreateDirectories)) return error;
+  if (auto error = disk_->ordered(Operation::CreateDirectories); error.failed()) return error;
   return disk_->makeDirectories(std::string(path), permissions);
 }
 
-MaybeError FakeFileSystem::createFile(std::string_view path) {
+Status FakeFileSystem::createFile(std::string_view path) {
   const std::lock_guard lock(disk_->mutex);
-  if (auto error = disk_->ordered(Operation::CreateFile)) return error;
+  if (auto error = disk_->ordered(Operation::CreateFile); error.failed()) return error;
   if (!disk_->directories.contains(parentOf(path))) return noSuchFile();
   if (disk_->files.contains(path) || disk_->directories.contains(path)) return fileExists();
   disk_->files.emplace(path, std::make_shared<std::string>());
   return {};
 }
 
-platform::Outcome<std::unique_ptr<platform::WritableFile>> FakeFileSystem::openForWriting(std::string_view path) {
+Result<std::unique_ptr<platform::WritableFile>> FakeFileSystem::openForWriting(std::string_view path) {
   const std::lock_guard lock(disk_->mutex);
-  if (auto error = disk_->ordered(Operation::OpenForWriting)) return {nullptr, std::move(error)};
+  if (auto error = disk_->ordered(Operation::OpenForWriting); error.failed()) return {nullptr, std::move(error)};
   const auto found = disk_->files.find(path);
   if (found == disk_->files.end()) return {nullptr, noSuchFile()};
   found->second->clear();
   return {std::make_unique<OpenFile>(disk_, found->second), {}};
 }
 
-platform::Outcome<std::string> FakeFileSystem::readFile(std::string_view path, std::size_t mostBytes) {
+Result<std::string> FakeFileSystem::readFile(std::string_view path, std::size_t mostBytes) {
   const std::lock_guard lock(disk_->mutex);
-  if (auto error = disk_->ordered(Operation::ReadFile)) return {{}, std::move(error)};
+  if (auto error = disk_->ordered(Operation::ReadFile); error.failed()) return {{}, std::move(error)};
   const auto found = disk_->files.find(path);
   if (found == disk_->files.end()) return {{}, noSuchFile()};
   if (found->second->size() > mostBytes) return {{}, fileTooLarge()};
@@ -153,9 +152,9 @@ bool FakeFileSystem::exists(std::string_view path) const {
   return disk_->files.contains(path) || disk_->directories.contains(path);
 }
 
-MaybeError FakeFileSystem::moveFile(std::string_view from, std::string_view to) {
+Status FakeFileSystem::moveFile(std::string_view from, std::string_view to) {
   const std::lock_guard lock(disk_->mutex);
-  if (auto error = disk_->ordered(Operation::MoveFile)) return error;
+  if (auto error = disk_->ordered(Operation::MoveFile); error.failed()) return error;
   const auto found = disk_->files.find(from);
   if (found == disk_->files.end() || !disk_->directories.contains(parentOf(to))) return noSuchFile();
   auto content = std::move(found->second);
@@ -164,7 +163,7 @@ MaybeError FakeFileSystem::moveFile(std::string_view from, std::string_view to) 
   return {};
 }
 
-void FakeFileSystem::failNext(Operation operation, PlatformError error, std::size_t skip) {
+void FakeFileSystem::failNext(Operation operation, Error error, std::size_t skip) {
   const std::lock_guard lock(disk_->mutex);
   disk_->orders.insert_or_assign(operation, Disk::Order{std::move(error), skip});
 }
@@ -176,7 +175,7 @@ void FakeFileSystem::setFreeBytes(std::optional<std::size_t> bytes) {
 
 void FakeFileSystem::putFile(std::string_view path, std::string_view content) {
   const std::lock_guard lock(disk_->mutex);
-  if (disk_->makeDirectories(parentOf(path), 0755)) return;
+  if (disk_->makeDirectories(parentOf(path), 0755).failed()) return;
   disk_->files.insert_or_assign(std::string(path), std::make_shared<std::string>(content));
 }
 

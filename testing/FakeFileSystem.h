@@ -27,16 +27,16 @@ class FakeFileSystem final : public platform::FileSystem {
 
   // The interface.
   std::string wellKnownDirectory(platform::WellKnownDirectory which) const override;
-  platform::MaybeError createDirectories(std::string_view path, std::uint32_t permissions) override;
-  platform::MaybeError createFile(std::string_view path) override;
-  platform::Outcome<std::unique_ptr<platform::WritableFile>> openForWriting(std::string_view path) override;
-  platform::Outcome<std::string> readFile(std::string_view path, std::size_t mostBytes) override;
+  Status createDirectories(std::string_view path, std::uint32_t permissions) override;
+  Status createFile(std::string_view path) override;
+  Result<std::unique_ptr<platform::WritableFile>> openForWriting(std::string_view path) override;
+  Result<std::string> readFile(std::string_view path, std::size_t mostBytes) override;
   bool exists(std::string_view path) const override;
-  platform::MaybeError moveFile(std::string_view from, std::string_view to) override;
+  Status moveFile(std::string_view from, std::string_view to) override;
 
   // Controls.
   // Lets the next call of the operation fail, or the `skip` + 1st from here. One such order for each operation.
-  void failNext(Operation operation, platform::PlatformError error, std::size_t skip = 0);
+  void failNext(Operation operation, Error error, std::size_t skip = 0);
   // The disk takes this many bytes more; a write beyond them keeps what fits and fails with error 28.
   void setFreeBytes(std::optional<std::size_t> bytes);
   // Puts a file there, with the directories above it.

@@ -22,9 +22,7 @@ FakeNotificationCenter::~FakeNotificationCenter() = default;
 platform::NotificationCenter::Registration FakeNotificationCenter::registerFor(
     std::string_view name, std::shared_ptr<platform::WorkQueue> queue, Handler handler) {
   const std::lock_guard lock(mutex_);
-  if (const auto status = std::exchange(failNextRegistration_, std::nullopt)) {
-    return {*status, -1};
-  }
+  if (const auto status = std::exchange(failNextRegistration_, std::nullopt)) return {*status, -1};
   auto listening = std::make_shared<Listening>();
   listening->name = name;
   listening->queue = std::move(queue);
@@ -37,9 +35,7 @@ platform::NotificationCenter::Registration FakeNotificationCenter::registerFor(
 std::optional<std::uint64_t> FakeNotificationCenter::state(std::int32_t token) const {
   const std::lock_guard lock(mutex_);
   const auto listening = listening_.find(token);
-  if (readsFail_ || listening == listening_.end()) {
-    return std::nullopt;
-  }
+  if (readsFail_ || listening == listening_.end()) return std::nullopt;
   const auto found = states_.find(listening->second->name);
   return found == states_.end() ? std::nullopt : std::optional(found->second);
 }
@@ -60,9 +56,7 @@ bool FakeNotificationCenter::post(std::string_view name, std::optional<std::uint
   std::vector<std::shared_ptr<Listening>> receivers;
   {
     const std::lock_guard lock(mutex_);
-    if (postsFail_) {
-      return false;
-    }
+    if (postsFail_) return false;
     posted_.push_back({std::string(name), state});
     std::uint64_t& word = states_[std::string(name)];
     word = state.value_or(word);
@@ -105,9 +99,7 @@ void FakeNotificationCenter::setState(std::string_view name, std::uint64_t state
 std::optional<std::int32_t> FakeNotificationCenter::tokenFor(std::string_view name) const {
   const std::lock_guard lock(mutex_);
   for (const auto& [token, listening] : listening_) {
-    if (listening->name == name) {
-      return token;
-    }
+    if (listening->name == name) return token;
   }
   return std::nullopt;
 }

@@ -14,7 +14,9 @@ class FakeProcessControl final : public platform::ProcessControl {
   // The interface.
   void exitProcess(int status) override {
     exitStatuses_.push_back(status);
-    if (onExit_) onExit_();
+    if (onExit_) {
+      onExit_();
+    }
   }
 
   // Controls.

@@ -13,14 +13,14 @@ namespace tarn::testing {
 class FakeProcessEnvironment final : public platform::ProcessEnvironment {
  public:
   // The interface.
-  platform::MaybeError set(std::string_view name, std::string_view value) override {
-    if (refusal_) return refusal_;
+  Status set(std::string_view name, std::string_view value) override {
+    if (refusal_.failed()) return refusal_;
     variables_.insert_or_assign(std::string(name), std::string(value));
     return {};
   }
 
   // Controls.
-  void refuse(platform::MaybeError error) { refusal_ = std::move(error); }
+  void refuse(Status error) { refusal_ = std::move(error); }
 
   // Observations.
   std::optional<std::string> value(std::string_view name) const {
@@ -29,7 +29,7 @@ class FakeProcessEnvironment final : public platform::ProcessEnvironment {
   }
 
  private:
-  platform::MaybeError refusal_;
+  Status refusal_;
   std::map<std::string, std::string, std::less<>> variables_;
 };
 

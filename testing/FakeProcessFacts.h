@@ -21,7 +21,7 @@ class FakeProcessFacts final : public platform::ProcessFacts {
     const auto found = names_.find(processIdentifier);
     return found == names_.end() ? std::nullopt : std::optional(found->second);
   }
-  Footprint physicalFootprint() const override { return footprint_; }
+  Result<std::uint64_t> physicalFootprint() const override { return footprint_; }
   platform::ThermalState thermalState() const override { return thermalState_; }
   bool lowPowerModeEnabled() const override { return lowPowerMode_; }
   platform::LoadAverages loadAverages() const override { return loadAverages_; }
@@ -32,14 +32,14 @@ class FakeProcessFacts final : public platform::ProcessFacts {
   }
   void removeProcess(std::int32_t processIdentifier) { names_.erase(processIdentifier); }
   void setPhysicalFootprint(std::uint64_t bytes) { footprint_ = {bytes, {}}; }
-  void failPhysicalFootprint(std::string error) { footprint_ = {std::nullopt, std::move(error)}; }
+  void failPhysicalFootprint(std::string error) { footprint_ = {0, Error{5, std::move(error)}}; }
   void setThermalState(platform::ThermalState state) { thermalState_ = state; }
   void setLowPowerModeEnabled(bool enabled) { lowPowerMode_ = enabled; }
   void setLoadAverages(platform::LoadAverages averages) { loadAverages_ = averages; }
 
  private:
   std::map<std::int32_t, std::string> names_{{kOwnProcessIdentifier, "tarnreportingd"}};
-  Footprint footprint_{std::uint64_t{8} << 20, {}};
+  Result<std::uint64_t> footprint_{std::uint64_t{8} << 20, {}};
   platform::ThermalState thermalState_ = platform::ThermalState::Nominal;
   bool lowPowerMode_ = false;
   platform::LoadAverages loadAverages_;

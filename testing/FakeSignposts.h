@@ -65,7 +65,9 @@ class FakeSignposts final : public platform::Signposts {
     name += '.';
     name += signpost.verb;
     std::string argument(signpost.argument.name);
-    if (!argument.empty()) argument += "=" + std::to_string(signpost.argument.value);
+    if (!argument.empty()) {
+      argument += "=" + std::to_string(signpost.argument.value);
+    }
     return {signpost.category, std::move(name), std::move(argument)};
   }
 

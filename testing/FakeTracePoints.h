@@ -23,7 +23,9 @@ class FakeTracePoints final : public platform::TracePoints {
   void emit(std::uint32_t code, std::int64_t argument) noexcept override {
     const std::lock_guard lock(mutex_);
     emitted_.push_back({code, argument});
-    if (onEmit_) onEmit_();
+    if (onEmit_) {
+      onEmit_();
+    }
   }
 
   // Controls.

@@ -26,13 +26,13 @@ bool ManualCondition::waitFor(std::chrono::duration<double> timeout) {
     hook = script_->hook;
   }
   const std::size_t signalsBefore = signals_;
-  WaitOutcome outcome = WaitOutcome::TimesOut;
+  WaitEnd end = WaitEnd::TimesOut;
   if (hook) {
     mutex_.unlock();
-    outcome = hook(timeout);
+    end = hook(timeout);
     mutex_.lock();
   }
-  return outcome == WaitOutcome::Wakes || signals_ != signalsBefore;
+  return end == WaitEnd::Wakes || signals_ != signalsBefore;
 }
 
 void ManualCondition::signal() {

@@ -19,7 +19,7 @@
 
 namespace tarn::testing {
 
-enum class WaitOutcome {
+enum class WaitEnd {
   TimesOut,  // unless the condition was signalled during the wait
   Wakes,     // with or without a signal
 };
@@ -49,7 +49,7 @@ class ManualCondition final : public platform::Condition {
 
 class ManualConditions final : public platform::Conditions {
  public:
-  using WaitHook = std::function<WaitOutcome(std::chrono::duration<double> timeout)>;
+  using WaitHook = std::function<WaitEnd(std::chrono::duration<double> timeout)>;
 
   ManualConditions();
   ~ManualConditions() override;

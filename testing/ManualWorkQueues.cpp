@@ -56,9 +56,7 @@ class ManualSchedule {
   }
   bool isCurrent(std::size_t queue, bool isServers) const {
     const std::lock_guard lock(mutex_);
-    if (running_.empty()) {
-      return isServers && maker_ == std::this_thread::get_id();
-    }
+    if (running_.empty()) return isServers && maker_ == std::this_thread::get_id();
     return running_.back() == queue && runner_ == std::this_thread::get_id();
   }
   std::size_t waiting(Filter filter) {
@@ -86,9 +84,7 @@ class ManualSchedule {
         return matches(piece, filter) && !suspended_.contains(piece.queue) &&
                std::find(running_.begin(), running_.end(), piece.queue) == running_.end();
       });
-      if (next == ready_.end()) {
-        return false;
-      }
+      if (next == ready_.end()) return false;
       work = std::move(next->work);
       running_.push_back(next->queue);
       runner_ = std::this_thread::get_id();
@@ -119,9 +115,7 @@ class ManualSchedule {
       clock_.advance(std::max(moment - now, std::chrono::nanoseconds(0)));
       const std::size_t ran = runUntilIdle({});
       pieces += ran;
-      if (ran == 0 && clock_.monotonic() >= target) {
-        return pieces;
-      }
+      if (ran == 0 && clock_.monotonic() >= target) return pieces;
     }
   }
   void dropAll() {
@@ -135,9 +129,7 @@ class ManualSchedule {
         delayed.swap(delayed_);
         suspended.swap(suspended_);
       }
-      if (ready.empty() && delayed.empty() && suspended.empty()) {
-        return;
-      }
+      if (ready.empty() && delayed.empty() && suspended.empty()) return;
     }
   }
 
@@ -290,9 +282,7 @@ void ManualWorkQueues::dropAll() {
 
 std::shared_ptr<ManualWorkQueue> ManualWorkQueues::find(std::string_view name) const {
   for (const Made& made : made_) {
-    if (auto queue = made.queue.lock(); queue != nullptr && made.name == name) {
-      return queue;
-    }
+    if (auto queue = made.queue.lock(); queue != nullptr && made.name == name) return queue;
   }
   return nullptr;
 }

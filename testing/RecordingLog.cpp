@@ -13,9 +13,7 @@ constexpr std::size_t kLineWidth = 5;
 }  // namespace
 
 std::string RecordingLog::Entry::message() const {
-  if (module.empty()) {
-    return text;
-  }
+  if (module.empty()) return text;
   const std::size_t prefix =
       std::max(module.size(), kModuleWidth) + 1 + std::max(std::to_string(line).size(), kLineWidth) + 1;
   return prefix < text.size() ? text.substr(prefix) : std::string();

@@ -23,7 +23,7 @@ class RecordingLog final : public platform::Log, public Recorded {
     std::string module;
     int line;
     std::string text;  // with its prefix
-    // The text behind the prefix of module and line; the whole text of an entry without a module.
+    // The text after the prefix of module and line; the whole text of an entry without a module.
     std::string message() const;
   };
 

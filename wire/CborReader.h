@@ -1,6 +1,6 @@
 // CborReader: walks over the bytes of a frame, one item head at a time. Internal to wire/.
 //
-// A head is the first byte of an item (three bits of major type, five of information) and the argument behind it. The
+// A head is the first byte of an item (three bits of major type, five of information) and the argument after it. The
 // reader never goes beyond the frame and allocates nothing.
 #pragma once
 
@@ -87,9 +87,7 @@ class CborReader {
 
   template <std::size_t kBytes>
   bool readBigEndian(std::uint64_t& value) noexcept {
-    if (left() < kBytes) {
-      return false;
-    }
+    if (left() < kBytes) return false;
     value = 0;
     for (std::size_t i = 0; i < kBytes; ++i) {
       value = value << 8U | at_[i];

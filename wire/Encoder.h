@@ -23,7 +23,7 @@ void appendValue(std::string& out, const plist::ValueView& value);
 
 class Encoder {
  public:
-  // Writes behind what `out` holds. `out` must outlive the encoder.
+  // Appends to what `out` holds. `out` must outlive the encoder.
   explicit Encoder(std::string& out) noexcept : out_(out) {}
   Encoder(const Encoder&) = delete;
   Encoder& operator=(const Encoder&) = delete;

@@ -34,16 +34,10 @@ std::span<std::byte> FrameBuffer::space() {
 
 FrameBuffer::Next FrameBuffer::next(std::span<const std::byte>& frame) noexcept {
   const std::size_t pending = pendingBytes();
-  if (pending < kFrameHeaderBytes) {
-    return Next::Incomplete;
-  }
+  if (pending < kFrameHeaderBytes) return Next::Incomplete;
   const std::size_t length = lengthAt(bytes_.get() + begin_);
-  if (length > maxFrameBytes_) {
-    return Next::Oversize;
-  }
-  if (pending - kFrameHeaderBytes < length) {
-    return Next::Incomplete;
-  }
+  if (length > maxFrameBytes_) return Next::Oversize;
+  if (pending - kFrameHeaderBytes < length) return Next::Incomplete;
   frame = {bytes_.get() + begin_ + kFrameHeaderBytes, length};
   begin_ += kFrameHeaderBytes + length;
   return Next::Frame;

@@ -134,7 +134,7 @@ constexpr std::optional<Operation> operationFromNumber(std::uint64_t number) noe
   return known ? std::optional(kOperations[index].operation) : std::nullopt;
 }
 
-// "createReportingSession", ..., "killService", "status", "settle". The text lives for ever.
+// "createReportingSession", ..., "killService", "status", "settle". The text is static.
 constexpr std::string_view operationName(Operation operation) noexcept {
   return rowOf(operation).name;
 }

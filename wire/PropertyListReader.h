@@ -30,7 +30,7 @@ class PropertyListReader {
  public:
   PropertyListReader(CborReader& in, Sink& sink) noexcept : in_(in), sink_(sink) {}
 
-  // What was wrong when a read returned false; a text that lives for ever.
+  // What was wrong when a read returned false; a static text.
   const char* trouble() const noexcept { return trouble_; }
 
   // The entries or items of a container whose head was read. `depth` is its level, 1 for an outermost one.
@@ -62,31 +62,23 @@ class PropertyListReader {
 
 template <class Sink>
 bool PropertyListReader<Sink>::mayHold(const CborHead& head, std::size_t depth) {
-  if (head.open()) {
-    return fail("a container of indefinite length");
-  }
+  if (head.open()) return fail("a container of indefinite length");
   return depth <= kMaxNesting || fail("nested too deep");
 }
 
 template <class Sink>
 bool PropertyListReader<Sink>::readEntries(const CborHead& head, std::size_t depth) {
-  if (!mayHold(head, depth)) {
-    return false;
-  }
+  if (!mayHold(head, depth)) return false;
   for (std::uint64_t i = 0; i < head.argument; ++i) {
     std::string_view key;
     CborHead valueHead;
-    if (!readKey(key) || !in_.readHead(valueHead)) {
-      return false;
-    }
+    if (!readKey(key) || !in_.readHead(valueHead)) return false;
     if (isContainer(valueHead)) [[unlikely]] {
       if (!readContainer(valueHead, &key, depth + 1)) return false;
       continue;
     }
     plist::ValueView value;
-    if (!readScalar(valueHead, value)) {
-      return false;
-    }
+    if (!readScalar(valueHead, value)) return false;
     sink_.add(key, value);
   }
   return true;
@@ -94,22 +86,16 @@ bool PropertyListReader<Sink>::readEntries(const CborHead& head, std::size_t dep
 
 template <class Sink>
 bool PropertyListReader<Sink>::readItems(const CborHead& head, std::size_t depth) {
-  if (!mayHold(head, depth)) {
-    return false;
-  }
+  if (!mayHold(head, depth)) return false;
   for (std::uint64_t i = 0; i < head.argument; ++i) {
     CborHead itemHead;
-    if (!in_.readHead(itemHead)) {
-      return false;
-    }
+    if (!in_.readHead(itemHead)) return false;
     if (isContainer(itemHead)) {
       if (!readContainer(itemHead, nullptr, depth + 1)) return false;
       continue;
     }
     plist::ValueView value;
-    if (!readScalar(itemHead, value)) {
-      return false;
-    }
+    if (!readScalar(itemHead, value)) return false;
     sink_.add(value);
   }
   return true;
@@ -118,18 +104,14 @@ bool PropertyListReader<Sink>::readItems(const CborHead& head, std::size_t depth
 template <class Sink>
 bool PropertyListReader<Sink>::readContainer(const CborHead& head, const std::string_view* key, std::size_t depth) {
   sink_.begin();
-  if (head.major == Major::Array) {
-    return readItems(head, depth) && sink_.endArray(key);
-  }
+  if (head.major == Major::Array) return readItems(head, depth) && sink_.endArray(key);
   return readEntries(head, depth) && (sink_.endDictionary(key) || fail("a key given twice"));
 }
 
 template <class Sink>
 bool PropertyListReader<Sink>::readKey(std::string_view& key) {
   CborHead head;
-  if (!in_.readHead(head)) {
-    return false;
-  }
+  if (!in_.readHead(head)) return false;
   if (head.major != Major::Text) [[unlikely]] {
     return fail("a key that is no text");
   }
@@ -177,9 +159,7 @@ bool PropertyListReader<Sink>::readString(const CborHead& head, plist::ValueView
     return fail(head.major == Major::Text ? "a text of indefinite length" : "data of indefinite length");
   }
   std::string_view bytes;
-  if (!in_.readBytes(head.argument, bytes)) {
-    return false;
-  }
+  if (!in_.readBytes(head.argument, bytes)) return false;
   if (head.major == Major::Bytes) {
     value = plist::ValueView(plist::DataView{bytes});
     return true;
@@ -215,22 +195,14 @@ bool PropertyListReader<Sink>::readSimple(const CborHead& head, plist::ValueView
 
 template <class Sink>
 bool PropertyListReader<Sink>::readDate(const CborHead& head, plist::ValueView& value) {
-  if (head.argument != 1) {
-    return fail("a tag other than that of a date");
-  }
+  if (head.argument != 1) return fail("a tag other than that of a date");
   CborHead number;
-  if (!in_.readHead(number)) {
-    return false;
-  }
+  if (!in_.readHead(number)) return false;
   const bool integer = number.major == Major::Unsigned || number.major == Major::Negative;
   const bool floating = number.major == Major::Simple && number.info >= 25 && number.info <= kInfoEightBytes;
-  if (!integer && !floating) {
-    return fail("a date that is no number");
-  }
+  if (!integer && !floating) return fail("a date that is no number");
   plist::ValueView seconds;
-  if (!readScalar(number, seconds)) {
-    return false;
-  }
+  if (!readScalar(number, seconds)) return false;
   value = plist::ValueView(plist::Date{seconds.asDouble()});
   return true;
 }

@@ -48,9 +48,7 @@ bool ReplyPass::run() {
   }
   reply_.id = id.argument;
   trouble_ = "an error that is neither null nor [domain, code, text]";
-  if (!readError()) {
-    return false;
-  }
+  if (!readError()) return false;
   trouble_ = "a result that is no property-list value";
   for (std::uint64_t i = 2; i < head.argument; ++i) {
     if (!readResult()) return false;
@@ -61,15 +59,9 @@ bool ReplyPass::run() {
 
 bool ReplyPass::readError() {
   CborHead head;
-  if (!in_.readHead(head)) {
-    return false;
-  }
-  if (head.major == Major::Simple && head.info == 22) {
-    return true;
-  }
-  if (head.major != Major::Array || head.open() || head.argument != 3) {
-    return false;
-  }
+  if (!in_.readHead(head)) return false;
+  if (head.major == Major::Simple && head.info == 22) return true;
+  if (head.major != Major::Array || head.open() || head.argument != 3) return false;
   ReplyError& error = reply_.error.emplace();
   CborHead codeHead;
   plist::ValueView code;
@@ -84,25 +76,17 @@ bool ReplyPass::readError() {
 bool ReplyPass::readErrorText(std::string& text) {
   CborHead head;
   plist::ValueView value;
-  if (!in_.readHead(head) || !reader_.readScalar(head, value) || !value.isText()) {
-    return false;
-  }
+  if (!in_.readHead(head) || !reader_.readScalar(head, value) || !value.isText()) return false;
   text = value.text();
   return true;
 }
 
 bool ReplyPass::readResult() {
   CborHead head;
-  if (!in_.readHead(head)) {
-    return false;
-  }
-  if (head.major == Major::Array || head.major == Major::Map) {
-    return readContainer(head, reply_.results.emplace_back());
-  }
+  if (!in_.readHead(head)) return false;
+  if (head.major == Major::Array || head.major == Major::Map) return readContainer(head, reply_.results.emplace_back());
   plist::ValueView value;
-  if (!reader_.readScalar(head, value)) {
-    return false;
-  }
+  if (!reader_.readScalar(head, value)) return false;
   reply_.results.emplace_back(value);
   return true;
 }
@@ -114,9 +98,7 @@ bool ReplyPass::readContainer(const CborHead& head, plist::Value& value) {
     value = builder_.finishArray();
     return true;
   }
-  if (!reader_.readEntries(head, 1)) {
-    return false;
-  }
+  if (!reader_.readEntries(head, 1)) return false;
   const std::optional<plist::Dictionary> dictionary = builder_.finishDictionary(keyLists_);
   if (dictionary) {
     value = *dictionary;
@@ -130,9 +112,7 @@ bool ReplyDecoder::decode(std::span<const std::byte> frame, DecodedReply& reply,
   reply.error.reset();
   reply.results.clear();
   ReplyPass pass(frame, reply, builder_, keyLists_);
-  if (pass.run()) {
-    return true;
-  }
+  if (pass.run()) return true;
   builder_.reset();
   reason = pass.trouble();
   return false;

@@ -64,9 +64,7 @@ bool RequestPass::run() {
 
 bool RequestPass::readFrameHead() {
   CborHead head;
-  if (!in_.readHead(head) || head.major != Major::Array) {
-    return false;
-  }
+  if (!in_.readHead(head) || head.major != Major::Array) return false;
   items_ = head.argument;
   openEnded_ = head.open();
   return !openEnded_ || countOpenItems();
@@ -87,27 +85,19 @@ bool RequestPass::countOpenItems() {
 bool RequestPass::readID() {
   trouble_ = "no readable id";
   CborHead head;
-  if (items_ < 1 || !in_.readHead(head) || head.major != Major::Unsigned) {
-    return false;
-  }
+  if (items_ < 1 || !in_.readHead(head) || head.major != Major::Unsigned) return false;
   request_.id = head.argument;
   hasID_ = true;
   return true;
 }
 
 bool RequestPass::readOperation() {
-  if (items_ < 2) {
-    return badArgument("an operation is missing");
-  }
+  if (items_ < 2) return badArgument("an operation is missing");
   CborHead head;
-  if (!in_.readHead(head)) {
-    return false;
-  }
+  if (!in_.readHead(head)) return false;
   const std::optional<Operation> operation =
       head.major == Major::Unsigned ? operationFromNumber(head.argument) : std::nullopt;
-  if (!operation) {
-    return fail(ErrorCode::UnknownOperation, "unknown operation");
-  }
+  if (!operation) return fail(ErrorCode::UnknownOperation, "unknown operation");
   request_.operation = *operation;
   hasOperation_ = true;
   return items_ - 2 == rowOf(*operation).arguments.size() || badArgument("wrong number of arguments");
@@ -130,9 +120,7 @@ bool RequestPass::readEnd() {
 
 bool RequestPass::read(std::int64_t& number, const char* expected) {
   CborHead head;
-  if (!in_.readHead(head)) {
-    return false;
-  }
+  if (!in_.readHead(head)) return false;
   const bool integer = head.major == Major::Unsigned || head.major == Major::Negative;
   if (!integer || head.argument > static_cast<std::uint64_t>(std::numeric_limits<std::int64_t>::max())) {
     return badArgument(expected);
@@ -145,24 +133,16 @@ bool RequestPass::read(std::int64_t& number, const char* expected) {
 template <class Number>
 bool RequestPass::read(Number& number, const char* expected) {
   CborHead head;
-  if (!in_.readHead(head)) {
-    return false;
-  }
-  if (head.major != Major::Unsigned || head.argument > std::numeric_limits<Number>::max()) {
-    return badArgument(expected);
-  }
+  if (!in_.readHead(head)) return false;
+  if (head.major != Major::Unsigned || head.argument > std::numeric_limits<Number>::max()) return badArgument(expected);
   number = static_cast<Number>(head.argument);
   return true;
 }
 
 bool RequestPass::read(plist::Dictionary& dictionary, const char* expected) {
   CborHead head;
-  if (!in_.readHead(head)) {
-    return false;
-  }
-  if (head.major != Major::Map) {
-    return badArgument(expected);
-  }
+  if (!in_.readHead(head)) return false;
+  if (head.major != Major::Map) return badArgument(expected);
   BuilderSink sink(builder_, keyLists_);
   PropertyListReader<BuilderSink> reader(in_, sink);
   builder_.begin();
@@ -181,20 +161,12 @@ bool RequestPass::read(plist::Dictionary& dictionary, const char* expected) {
 
 bool RequestPass::read(ReporterIDs& reporterIDs, const char* expected) {
   CborHead head;
-  if (!in_.readHead(head)) {
-    return false;
-  }
-  if (head.major == Major::Simple && head.info == 22) {
-    return true;
-  }
-  if (head.major != Major::Array || (!head.open() && head.argument > in_.left())) {
-    return badArgument(expected);
-  }
+  if (!in_.readHead(head)) return false;
+  if (head.major == Major::Simple && head.info == 22) return true;
+  if (head.major != Major::Array || (!head.open() && head.argument > in_.left())) return badArgument(expected);
   constexpr const char* kTooMany = "reporter IDs: at most 65536 expected";
   static_assert(kMaxReporterIDs == 65536);
-  if (head.argument > kMaxReporterIDs) {
-    return badArgument(kTooMany);
-  }
+  if (head.argument > kMaxReporterIDs) return badArgument(kTooMany);
   std::vector<std::int64_t>& ids = reporterIDs.emplace();
   ids.reserve(static_cast<std::size_t>(head.argument));
   while (head.open() ? !in_.atBreak() : ids.size() < head.argument) {
@@ -209,9 +181,7 @@ bool RequestPass::read(ReporterIDs& reporterIDs, const char* expected) {
 
 std::string RequestPass::describe() const {
   const char* trouble = trouble_ != nullptr ? trouble_ : "not well-formed";
-  if (!hasOperation_) {
-    return trouble;
-  }
+  if (!hasOperation_) return trouble;
   std::string text(operationName(request_.operation));
   text += code_ == ErrorCode::NotPropertyList ? ": not a property list: " : ": ";
   return text += trouble;
@@ -219,23 +189,23 @@ std::string RequestPass::describe() const {
 
 }  // namespace
 
-DecodeOutcome RequestDecoder::decode(std::span<const std::byte> frame, DecodedRequest& request, Refusal& refusal) {
+DecodeVerdict RequestDecoder::decode(std::span<const std::byte> frame, DecodedRequest& request, Refusal& refusal) {
   request = DecodedRequest{};
   RequestPass pass(frame, request, builder_, keyLists_);
   if (pass.run()) [[likely]] {
-    return DecodeOutcome::Ok;
+    return DecodeVerdict::Ok;
   }
   if (const char* why = checkOneItem(frame)) {
     refusal.text = why;
-    return DecodeOutcome::Unreadable;
+    return DecodeVerdict::Unreadable;
   }
   if (!pass.hasID()) {
     refusal.text = pass.trouble();
-    return DecodeOutcome::Unreadable;
+    return DecodeVerdict::Unreadable;
   }
   refusal.code = pass.code();
   refusal.text = pass.describe();
-  return DecodeOutcome::Refused;
+  return DecodeVerdict::Refused;
 }
 
 }  // namespace tarn::wire

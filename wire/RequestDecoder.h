@@ -4,7 +4,7 @@
 // A good frame is decoded in one pass. Only when that pass meets trouble is the frame looked at again, to tell a frame
 // that can be answered with an error from one that can't be read at all:
 //
-//   not one whole well-formed CBOR array, bytes behind it, no unsigned id    Unreadable: close the connection
+//   not one whole well-formed CBOR array, bytes after it, no unsigned id    Unreadable: close the connection
 //   unknown operation; wrong count, kind or range of an argument; something
 //   inside a dictionary argument that is no property list                    Refused: answer with the error, go on
 //
@@ -25,7 +25,7 @@
 
 namespace tarn::wire {
 
-enum class DecodeOutcome {
+enum class DecodeVerdict {
   Ok,
   Refused,     // the id is known, the refusal says what to answer
   Unreadable,  // the refusal's text says why
@@ -42,9 +42,9 @@ class RequestDecoder {
   RequestDecoder(const RequestDecoder&) = delete;
   RequestDecoder& operator=(const RequestDecoder&) = delete;
 
-  // `request` is whole when the outcome is Ok; its id also counts when it is Refused. `refusal` is filled in otherwise.
+  // `request` is whole when the verdict is Ok; its id also counts when it is Refused. `refusal` is filled in otherwise.
   // Members that the operation doesn't have are left at their defaults.
-  DecodeOutcome decode(std::span<const std::byte> frame, DecodedRequest& request, Refusal& refusal);
+  DecodeVerdict decode(std::span<const std::byte> frame, DecodedRequest& request, Refusal& refusal);
 
  private:
   plist::PackedBuilder builder_;

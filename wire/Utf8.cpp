@@ -29,16 +29,10 @@ Lead leadOf(unsigned char byte) noexcept {
 
 std::size_t utf8CharacterLength(std::string_view text) noexcept {
   const Lead lead = leadOf(static_cast<unsigned char>(text[0]));
-  if (lead.length < 2) {
-    return lead.length;
-  }
-  if (text.size() < lead.length) {
-    return 0;
-  }
+  if (lead.length < 2) return lead.length;
+  if (text.size() < lead.length) return 0;
   const auto second = static_cast<unsigned char>(text[1]);
-  if (second < lead.secondMin || second > lead.secondMax) {
-    return 0;
-  }
+  if (second < lead.secondMin || second > lead.secondMax) return 0;
   for (std::size_t i = 2; i < lead.length; ++i) {
     if ((static_cast<unsigned char>(text[i]) & 0xC0U) != 0x80) return 0;
   }
@@ -48,9 +42,7 @@ std::size_t utf8CharacterLength(std::string_view text) noexcept {
 bool isUtf8ByCharacter(std::string_view text) noexcept {
   while (!text.empty()) {
     const std::size_t length = utf8CharacterLength(text);
-    if (length == 0) {
-      return false;
-    }
+    if (length == 0) return false;
     text.remove_prefix(length);
   }
   return true;

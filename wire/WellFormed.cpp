@@ -31,13 +31,9 @@ class Skipper {
   static constexpr std::uint32_t kOpenMapValue = kOpenArray - 2;
 
   const char* step() {
-    if (in_.atBreak()) {
-      return takeBreak();
-    }
+    if (in_.atBreak()) return takeBreak();
     CborHead head;
-    if (!in_.readHead(head)) {
-      return in_.atEnd() ? kEndsInside : kReserved;
-    }
+    if (!in_.readHead(head)) return in_.atEnd() ? kEndsInside : kReserved;
     if (head.major == Major::Tag) {
       behindTag_ = true;  // the tagged item is the one that counts
       return nullptr;
@@ -69,15 +65,15 @@ class Skipper {
       top = kOpenMapKey;
     } else if (top != kOpenArray) {
       --needed_;
-      if (--top == 0) open_.pop_back();
+      if (--top == 0) {
+        open_.pop_back();
+      }
     }
   }
 
   const char* takeBreak() {
     const std::uint32_t top = open_.back();
-    if (behindTag_ || (top != kOpenArray && top != kOpenMapKey)) {
-      return kStrayBreak;
-    }
+    if (behindTag_ || (top != kOpenArray && top != kOpenMapKey)) return kStrayBreak;
     in_.skip(1);
     open_.pop_back();
     --needed_;
@@ -91,9 +87,7 @@ class Skipper {
       ++needed_;
       return nullptr;
     }
-    if (head.argument > in_.left() / (map ? 2 : 1)) {
-      return kEndsInside;
-    }
+    if (head.argument > in_.left() / (map ? 2 : 1)) return kEndsInside;
     const auto items = static_cast<std::uint32_t>(head.argument * (map ? 2 : 1));
     if (items > 0) {
       open_.push_back(items);
@@ -110,12 +104,8 @@ class Skipper {
   const char* takeChunks(Major major) {
     while (!in_.atBreak()) {
       CborHead head;
-      if (!in_.readHead(head)) {
-        return in_.atEnd() ? kEndsInside : kReserved;
-      }
-      if (head.major != major || head.open()) {
-        return "a string whose parts are no strings of its kind";
-      }
+      if (!in_.readHead(head)) return in_.atEnd() ? kEndsInside : kReserved;
+      if (head.major != major || head.open()) return "a string whose parts are no strings of its kind";
       if (const char* why = takeBytes(head.argument)) return why;
     }
     in_.skip(1);
@@ -136,9 +126,7 @@ const char* skipItem(CborReader& in) {
 
 const char* checkOneItem(std::span<const std::byte> bytes) {
   CborReader in(bytes);
-  if (const char* why = skipItem(in)) {
-    return why;
-  }
+  if (const char* why = skipItem(in)) return why;
   return in.atEnd() ? nullptr : "bytes behind the array";
 }
 

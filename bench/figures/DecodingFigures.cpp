@@ -26,7 +26,9 @@ std::span<const std::byte> asBytes(const std::string& text) {
 }
 
 void mustHold(bool decoded) {
-  if (!decoded) fail("a decoder refused the message");
+  if (!decoded) {
+    fail("a decoder refused the message");
+  }
 }
 
 double toViews(std::size_t count, const std::string& message) {
@@ -44,7 +46,7 @@ double toRequest(std::size_t count, const std::string& frame) {
   wire::Refusal refusal;
   const auto bytes = asBytes(frame).subspan(wire::kFrameHeaderBytes);
   return nanosecondsEach(count, [&](std::size_t) {
-    mustHold(decoder.decode(bytes, request, refusal) == wire::DecodeOutcome::Ok);
+    mustHold(decoder.decode(bytes, request, refusal) == wire::DecodeVerdict::Ok);
     keep(&request);
   });
 }
@@ -66,7 +68,9 @@ double bareWalk(std::size_t count, const std::string& message) {
     std::uint64_t sum = 0;
     while (in.readHead(head)) {
       sum += head.argument;
-      if (head.major == wire::Major::Text) in.readBytes(head.argument, text);
+      if (head.major == wire::Major::Text) {
+        in.readBytes(head.argument, text);
+      }
     }
     keep(sum);
   });

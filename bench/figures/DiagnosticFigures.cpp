@@ -63,18 +63,14 @@ constexpr std::array kFigures{
 // The Snare worker of the session, null without one.
 const TarnReportingSessionSnareWorker* snareWorkerOf(const TarnReportingSession& session) {
   for (const auto& member : session.workers().messageWorkers()) {
-    if (const auto* snare = dynamic_cast<const TarnReportingSessionSnareWorker*>(member.worker.get())) {
-      return snare;
-    }
+    if (const auto* snare = dynamic_cast<const TarnReportingSessionSnareWorker*>(member.worker.get())) return snare;
   }
   return nullptr;
 }
 
 std::size_t messagesHeld(const TarnReportingSession& session) {
   const TarnReportingSessionSnareWorker* const snare = snareWorkerOf(session);
-  if (snare == nullptr) {
-    return 0;
-  }
+  if (snare == nullptr) return 0;
   return static_cast<std::size_t>(
       std::count_if(snare->instances().begin(), snare->instances().end(),
                     [](const auto& member) { return member.instance->workerState().lastMessage != nullptr; }));
@@ -124,7 +120,7 @@ std::vector<double> measureAdded(const Figure& figure, std::size_t windows) {
   Intake with(figure.workers);
   without.warm();
   with.warm();
-  // Behind the first of the others: a key list remembers the first list that was made of it, which has to be theirs.
+  // After the first of the others: a key list remembers the first list that was made of it, which has to be theirs.
   if (figure.held) {
     sendWanted(with.session());
   }

@@ -1,4 +1,4 @@
-// The comparison behind the redundancy test: whether two messages say the same, leaving out when they were sent.
+// The comparison of the redundancy test: whether two messages say the same, leaving out when they were sent.
 #include <algorithm>
 #include <array>
 #include <vector>
@@ -32,13 +32,17 @@ bool equalIgnoring(const VariantMap& a, const VariantMap& b) {
 double ofDictionaries(std::size_t count, const std::vector<plist::Dictionary>& messages,
                       const plist::Dictionary& earlier, bool expected) {
   return nanosecondsEach(count, [&](std::size_t i) {
-    if (messages[i % kMoments].equalsIgnoring(earlier, kIgnored) != expected) fail("a comparison went wrong");
+    if (messages[i % kMoments].equalsIgnoring(earlier, kIgnored) != expected) {
+      fail("a comparison went wrong");
+    }
   });
 }
 
 double ofMaps(std::size_t count, const std::vector<VariantMap>& messages, const VariantMap& earlier, bool expected) {
   return nanosecondsEach(count, [&](std::size_t i) {
-    if (equalIgnoring(messages[i % kMoments], earlier) != expected) fail("a comparison went wrong");
+    if (equalIgnoring(messages[i % kMoments], earlier) != expected) {
+      fail("a comparison went wrong");
+    }
   });
 }
 

@@ -10,7 +10,7 @@
 #include "bench/Measure.h"
 #include "bench/Message.h"
 #include "bench/figures/Figures.h"
-#include "client/TarnReportingClient.h"
+#include "client/ClientConnection.h"
 #include "host/loop/LinuxWorkQueues.h"
 #include "host/machine/LinuxClock.h"
 #include "platform/Facilities.h"
@@ -166,11 +166,11 @@ std::vector<double> measureLiveSessions(const Settings& settings) {
   ServiceSetup setup;
   setup.mirrorsSessions = true;
   const ServiceProcess service(settings, setup);
-  auto connected = client::TarnReportingClient::connect(service.socketPath());
-  if (!connected.client) {
-    fail("can't connect: " + connected.error);
+  auto connected = client::ClientConnection::connect(service.socketPath());
+  if (connected.failed()) {
+    fail("can't connect: " + connected.error->text);
   }
-  client::TarnReportingClient& client = *connected.client;
+  client::ClientConnection& client = *connected.value;
   const auto startSessions = [&](std::int64_t from, std::size_t count) {
     for (std::size_t i = 0; i < count; ++i) {
       const std::int64_t id = from + static_cast<std::int64_t>(i);

@@ -47,7 +47,9 @@ double callsRecorded(std::size_t count, linux_host::LinuxSignposts& signposts) {
   signposts.add(buffer);
   const double each = nanosecondsEach(count, [&](std::size_t i) {
     const TarnReportingSignpost signpost = post();
-    if (i % (kBuffered / 2) == 0) keep(buffer->drain().records.size());
+    if (i % (kBuffered / 2) == 0) {
+      keep(buffer->drain().records.size());
+    }
   });
   signposts.remove(buffer.get());
   return each;

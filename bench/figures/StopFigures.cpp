@@ -46,7 +46,7 @@ double allocatedBytes() {
   return static_cast<double>(facts.uordblks + facts.hblkhd);
 }
 
-// Stops behind all other workers, when the log is at its longest and nothing else is left of the stop: sees what the
+// Stops after all other workers, when the log is at its longest and nothing else is left of the stop: sees what the
 // log takes.
 class LogWitness final : public TarnReportingSessionWorkerProtocol {
  public:

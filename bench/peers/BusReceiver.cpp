@@ -48,9 +48,7 @@ bool readDictionary(sd_bus_message* message) {
 }
 
 int handleMessage(sd_bus_message* message, void*, sd_bus_error*) {
-  if (!readDictionary(message)) {
-    return sd_bus_reply_method_errorf(message, SD_BUS_ERROR_INVALID_ARGS, "no dictionary");
-  }
+  if (!readDictionary(message)) return sd_bus_reply_method_errorf(message, SD_BUS_ERROR_INVALID_ARGS, "no dictionary");
   return sd_bus_reply_method_return(message, nullptr);
 }
 

@@ -36,7 +36,9 @@ std::vector<std::int64_t> Reply::numbers() const {
   std::vector<std::int64_t> numbers;
   if (const auto* array = results.empty() ? nullptr : results.front().as<Array>()) {
     for (const Value& item : *array) {
-      if (const auto* number = item.as<std::int64_t>()) numbers.push_back(*number);
+      if (const auto* number = item.as<std::int64_t>()) {
+        numbers.push_back(*number);
+      }
     }
   }
   return numbers;

@@ -1,4 +1,4 @@
-#include "client/TarnReportingClient.h"
+#include "client/ClientConnection.h"
 
 #include <utility>
 
@@ -11,9 +11,7 @@ namespace tarnkit {
 namespace {
 
 tarn::client::ReplyHandler unpacking(ReplyHandler handler) {
-  if (!handler) {
-    return {};
-  }
+  if (!handler) return {};
   return [handler = std::move(handler)](tarn::client::Reply&& reply) {
     handler(tarn::client::unpacked(std::move(reply)));
   };
@@ -22,17 +20,17 @@ tarn::client::ReplyHandler unpacking(ReplyHandler handler) {
 }  // namespace
 
 TarnReportingClient::Connected TarnReportingClient::connect(const std::string& path, const Options& options) {
-  auto inner = tarn::client::TarnReportingClient::connect(path, options);
+  auto inner = tarn::client::ClientConnection::connect(path, options);
   Connected connected;
-  connected.errorNumber = inner.errorNumber;
-  connected.error = std::move(inner.error);
-  if (inner.client) {
-    connected.client = std::make_unique<TarnReportingClient>(std::move(inner.client));
+  connected.errorNumber = static_cast<int>(inner.error.code());
+  connected.error = inner.error.text();
+  if (inner.ok()) {
+    connected.client = std::make_unique<TarnReportingClient>(std::move(inner.value));
   }
   return connected;
 }
 
-TarnReportingClient::TarnReportingClient(std::unique_ptr<tarn::client::TarnReportingClient> client)
+TarnReportingClient::TarnReportingClient(std::unique_ptr<tarn::client::ClientConnection> client)
     : client_(std::move(client)) {}
 
 TarnReportingClient::~TarnReportingClient() = default;

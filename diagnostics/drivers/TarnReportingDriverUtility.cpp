@@ -5,7 +5,6 @@
 #include <charconv>
 #include <cmath>
 #include <cstdint>
-#include <mutex>
 #include <optional>
 #include <utility>
 
@@ -58,13 +57,13 @@ Name nameOf(const char* text) {
   return text == nullptr ? Name() : Name(text);
 }
 
-std::int64_t codeOf(const platform::MaybeError& error) {
-  return error ? error->code : 0;
+std::int64_t codeOf(const Status& error) {
+  return error.failed() ? error->code : 0;
 }
 
 // Of sampling and of taking a difference alike.
-void logSamplingError(const platform::MaybeError& error) {
-  if (error) {
+void logSamplingError(const Status& error) {
+  if (error.failed()) {
     kLog(LogLevel::Error, "FlumeCreateSamples error %li", error->code);
   }
 }
@@ -94,15 +93,15 @@ void send(TarnReportingSession& session, plist::Dictionary stats, AudioEventType
 
 // The process's one and the lock on it.
 struct Shared {
-  std::mutex lock;
-  std::shared_ptr<const TarnReportingDriverUtility> utility;  // guarded by lock
+  Mutex lock;
+  std::shared_ptr<const TarnReportingDriverUtility> utility TARN_GUARDED_BY(lock);
 };
 
 }  // namespace
 
 std::shared_ptr<const TarnReportingDriverUtility> TarnReportingDriverUtility::shared() {
   const auto shared = ProcessState::of<Shared>();
-  const std::lock_guard guard(shared->lock);
+  const MutexLock guard(shared->lock);
   platform::FlumeService* const flume = TarnReportingFacilities().flume;
   if (shared->utility == nullptr && flume != nullptr) {
     const auto utility = std::make_shared<TarnReportingDriverUtility>(*flume);
@@ -164,9 +163,7 @@ void TarnReportingDriverUtility::sendDriverLogsForSession(TarnReportingSession& 
     auto samples = flume_.createSamples(*each.subscription, each.subscribedChannels);
     kLog(LogLevel::Info, "done getting latest samples");
     logSamplingError(samples.error);
-    if (samples.value == nullptr) {
-      continue;
-    }
+    if (samples.value == nullptr) continue;
     const auto earlier = driverSnapShot.find(each.driver.description());
     const auto delta = flume_.createDelta(earlier == driverSnapShot.end() ? nullptr : earlier->second, samples.value);
     logSamplingError(delta.error);
@@ -218,9 +215,7 @@ void TarnReportingDriverUtility::processHistogramData(const FlumeChannel& channe
           std::to_string(bucket.lower) + "-" + std::to_string(bucket.upper) + ":" + std::to_string(bucket.hits) + ";";
     }
   }
-  if (buckets.empty()) {
-    return;
-  }
+  if (buckets.empty()) return;
   buckets.pop_back();
   std::string text = "count=" + std::to_string(channel.buckets.size()) + ",lower=" + std::to_string(lower) +
                      ",upper=" + std::to_string(upper) + ",min=" + std::to_string(channel.minimum) +

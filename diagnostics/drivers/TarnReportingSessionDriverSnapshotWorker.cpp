@@ -8,9 +8,7 @@ namespace tarn {
 
 std::unique_ptr<TarnReportingSessionDriverSnapshotWorker> TarnReportingSessionDriverSnapshotWorker::initWithSession(
     const std::shared_ptr<TarnReportingSession>& session) {
-  if (TarnReportingFacilities().flume == nullptr) {
-    return nullptr;
-  }
+  if (TarnReportingFacilities().flume == nullptr) return nullptr;
   return std::make_unique<TarnReportingSessionDriverSnapshotWorker>(session);
 }
 

@@ -77,15 +77,11 @@ void AudioIssueDetected::readField(WireReader& reader, std::uint64_t number) {
 }
 
 bool AudioIssueDetected::readFrom(WireReader& reader) {
-  if (reader.atEnd()) {
-    return true;
-  }
+  if (reader.atEnd()) return true;
   while (!reader.atEnd() && !reader.failed()) {
     const std::uint64_t tag = reader.readVarint();
     const auto type = static_cast<unsigned>(tag & kWireTypeMask);
-    if (reader.failed() || type == static_cast<unsigned>(WireType::GroupEnd)) {
-      break;
-    }
+    if (reader.failed() || type == static_cast<unsigned>(WireType::GroupEnd)) break;
     const std::uint64_t number = tag >> kWireTypeBits;
     if (number >= kTimestamp && number <= kRtaidclient) {
       readField(reader, number);

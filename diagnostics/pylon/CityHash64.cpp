@@ -60,9 +60,7 @@ std::uint64_t hashUpTo16(std::string_view bytes) {
     const std::uint64_t d = (std::rotr(a, 25) + b) * multiplier;
     return mix(c, d, multiplier);
   }
-  if (length >= 4) {
-    return mix(length + (load32(bytes, 0) << 3U), load32(bytes, length - 4), multiplier);
-  }
+  if (length >= 4) return mix(length + (load32(bytes, 0) << 3U), load32(bytes, length - 4), multiplier);
   if (length > 0) {
     const std::uint64_t y = byteAt(bytes, 0) + (byteAt(bytes, length / 2) << 8U);
     const std::uint64_t z = length + (byteAt(bytes, length - 1) << 2U);
@@ -140,12 +138,8 @@ std::uint64_t hashBeyond64(std::string_view bytes) {
 }  // namespace
 
 std::uint64_t cityHash64(std::string_view bytes) noexcept {
-  if (bytes.size() <= 16) {
-    return hashUpTo16(bytes);
-  }
-  if (bytes.size() <= 32) {
-    return hash17To32(bytes);
-  }
+  if (bytes.size() <= 16) return hashUpTo16(bytes);
+  if (bytes.size() <= 32) return hash17To32(bytes);
   return bytes.size() <= kBlockBytes ? hash33To64(bytes) : hashBeyond64(bytes);
 }
 

@@ -89,9 +89,7 @@ std::unique_ptr<TarnReportingSessionPylonWorker> TarnReportingSessionPylonWorker
 }
 
 void TarnReportingSessionPylonWorker::handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) {
-  if (!message || message->type() != AudioEventType::IssueDetector) {
-    return;
-  }
+  if (!message || message->type() != AudioEventType::IssueDetector) return;
   const AudioIssueDetected record = recordOf(message->message());
   TarnReportingFacilities().pylon->post(kMetricIdentifier, PostedRecord(record));
 }

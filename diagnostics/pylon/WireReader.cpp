@@ -50,9 +50,7 @@ void WireReader::readString(std::string& text) {
 }
 
 bool WireReader::skipBytes(std::uint64_t count) noexcept {
-  if (count > bytes_.size() - position_) {
-    return fail();
-  }
+  if (count > bytes_.size() - position_) return fail();
   position_ += static_cast<std::size_t>(count);
   return true;
 }
@@ -84,18 +82,12 @@ bool WireReader::skipGroup(std::uint64_t fieldNumber) {
     const std::uint64_t tag = readVarint();
     const auto type = static_cast<unsigned>(tag & kWireTypeMask);
     const std::uint64_t number = tag >> kWireTypeBits;
-    if (failed_) {
-      return false;
-    }
+    if (failed_) return false;
     if (type == static_cast<unsigned>(WireType::GroupStart)) {
-      if (open.size() == kDeepestGroup) {
-        return fail();
-      }
+      if (open.size() == kDeepestGroup) return fail();
       open.push_back(number);
     } else if (type == static_cast<unsigned>(WireType::GroupEnd)) {
-      if (open.back() != number) {
-        return fail();
-      }
+      if (open.back() != number) return fail();
       open.pop_back();
     } else if (!skipSimple(type)) {
       return false;

@@ -27,9 +27,7 @@ constexpr std::string_view kHapticsCapability = "haptics";
 std::unique_ptr<TarnReportingSessionSnareWorker> TarnReportingSessionSnareWorker::initWithSession(
     const std::shared_ptr<TarnReportingSession>& session) {
   const platform::Facilities& facilities = TarnReportingFacilities();
-  if (!TarnReportingUtilityIsInternalBuild() || facilities.snare == nullptr) {
-    return nullptr;
-  }
+  if (!TarnReportingUtilityIsInternalBuild() || facilities.snare == nullptr) return nullptr;
   auto worker = std::make_unique<TarnReportingSessionSnareWorker>(session);
   if (facilities.deviceProperties.boolean(kHapticsCapability).value_or(false)) {
     worker->addInstance(InstanceClass::of<TarnReportingSnareWorkerInstanceHapticLeaks>());
@@ -42,9 +40,7 @@ std::unique_ptr<TarnReportingSessionSnareWorker> TarnReportingSessionSnareWorker
 
 void TarnReportingSessionSnareWorker::addInstance(const InstanceClass& instanceClass) {
   const std::shared_ptr<TarnReportingSession> owner = session();
-  if (!owner) {
-    return;
-  }
+  if (!owner) return;
   if (owner->isSingleMessageSession() &&
       (instanceClass.handleSingleMessageSession == nullptr || !instanceClass.handleSingleMessageSession())) {
     return;
@@ -65,9 +61,7 @@ bool TarnReportingSessionSnareWorker::start() {
 }
 
 void TarnReportingSessionSnareWorker::handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) {
-  if (!message) {
-    return;
-  }
+  if (!message) return;
   for (const Member& member : instances_) {
     // Interest first: it changes nothing and mostly ends at a number, while a comparison walks two payloads.
     if (member.instance->interestedInMessage(*message) &&
@@ -79,9 +73,7 @@ void TarnReportingSessionSnareWorker::handleMessage(const std::shared_ptr<TarnRe
 
 void TarnReportingSessionSnareWorker::handleInterest(const Member& member, const TarnReportingSessionMessage& message) {
   const std::shared_ptr<TarnReportingSession> owner = session();
-  if (!owner) {
-    return;
-  }
+  if (!owner) return;
   kLog(LogLevel::Debug, "Interested in message. instance=%@, %@", member.instanceClass.name,
        [&message] { return message.description(); });
   WorkerInstanceState& state = member.instance->workerState();

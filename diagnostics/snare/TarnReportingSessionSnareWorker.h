@@ -37,7 +37,7 @@ class TarnReportingSessionSnareWorker : public TarnReportingSessionWorkerProtoco
   // Without instances.
   using TarnReportingSessionWorkerProtocol::TarnReportingSessionWorkerProtocol;
 
-  // Adds an instance of the class behind the others, unless the class or this session declines.
+  // Adds an instance of the class after the others, unless the class or this session declines.
   void addInstance(const InstanceClass& instanceClass);
   // In the order in which they were added.
   const std::vector<Member>& instances() const noexcept { return instances_; }

@@ -11,7 +11,7 @@ std::shared_ptr<TarnReportingSnareProcessState> TarnReportingSnareProcessState::
 
 std::shared_ptr<WorkerInstanceState> TarnReportingSnareProcessState::stateFor(
     std::string_view className, std::shared_ptr<WorkerInstanceState> (*make)()) {
-  const std::lock_guard guard(mutex_);
+  const MutexLock guard(mutex_);
   std::shared_ptr<WorkerInstanceState>& state = states_[className];
   if (state == nullptr) {
     state = make();

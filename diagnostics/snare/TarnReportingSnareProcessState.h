@@ -8,9 +8,10 @@
 
 #include <map>
 #include <memory>
-#include <mutex>
 #include <optional>
 #include <string_view>
+
+#include "plist/ThreadSafety.h"
 
 namespace tarn {
 
@@ -20,8 +21,8 @@ class TarnReportingSnareProcessState {
  public:
   // When a detector fired last, whatever the session. Its holder keeps the lock for a whole fire.
   struct RateLimit {
-    std::mutex lock;
-    std::optional<double> lastFire;  // epoch seconds; guarded by lock
+    Mutex lock;
+    std::optional<double> lastFire TARN_GUARDED_BY(lock);  // epoch seconds
   };
 
   // The shared instance.
@@ -31,15 +32,15 @@ class TarnReportingSnareProcessState {
   TarnReportingSnareProcessState(const TarnReportingSnareProcessState&) = delete;
   TarnReportingSnareProcessState& operator=(const TarnReportingSnareProcessState&) = delete;
 
-  // The state of a detector class; made by `make` when there is none yet, else as it is. The name lives for ever.
+  // The state of a detector class; made by `make` when there is none yet, else as it is. The name is static.
   std::shared_ptr<WorkerInstanceState> stateFor(std::string_view className,
                                                 std::shared_ptr<WorkerInstanceState> (*make)());
   // Of the detector of stuck system sounds.
   RateLimit& systemSoundRateLimit() noexcept { return systemSoundRateLimit_; }
 
  private:
-  std::mutex mutex_;
-  std::map<std::string_view, std::shared_ptr<WorkerInstanceState>> states_;  // guarded by mutex_
+  Mutex mutex_;
+  std::map<std::string_view, std::shared_ptr<WorkerInstanceState>> states_ TARN_GUARDED_BY(mutex_);
   RateLimit systemSoundRateLimit_;
 };
 

@@ -20,9 +20,7 @@ std::optional<std::string> clientProcessNameOf(const TarnReportingSession& sessi
 
 std::unique_ptr<TarnReportingSnareWorkerInstanceAlarmLowRMS>
 TarnReportingSnareWorkerInstanceAlarmLowRMS::initWithSession(const std::shared_ptr<TarnReportingSession>& session) {
-  if (session->isSingleMessageSession()) {
-    return nullptr;
-  }
+  if (session->isSingleMessageSession()) return nullptr;
   auto state = std::make_shared<WorkerInstanceState>();
   state->interestThresholdDurationSeconds = 15.0;
   state->interestThresholdCount = 3;
@@ -33,9 +31,7 @@ TarnReportingSnareWorkerInstanceAlarmLowRMS::initWithSession(const std::shared_p
 bool TarnReportingSnareWorkerInstanceAlarmLowRMS::interestedInMessage(
     const TarnReportingSessionMessage& message) const {
   static const plist::Key kIssueType("issue_type");
-  if (message.category() != AudioEventCategory::Error || message.type() != AudioEventType::IssueDetector) {
-    return false;
-  }
+  if (message.category() != AudioEventCategory::Error || message.type() != AudioEventType::IssueDetector) return false;
   const std::shared_ptr<TarnReportingSession> owner = session();
   return owner &&
          (owner->serviceType() == AudioServiceType::Alarms || owner->serviceType() == AudioServiceType::Test) &&
@@ -46,9 +42,7 @@ void TarnReportingSnareWorkerInstanceAlarmLowRMS::fire(const TarnReportingSessio
   using Operations = TarnReportingSnareOperations;
   const std::shared_ptr<TarnReportingSession> owner = session();
   const std::shared_ptr<platform::SnareReporter> reporter = workerState().symptomReporter;
-  if (!owner) {
-    return;
-  }
+  if (!owner) return;
   const bool accepted = reporter->startSession(
       {Operations::signatureFromMessage(message, owner->serviceType(), *reporter, clientProcessNameOf(*owner)),
        snareAlarmLowRmsDuration_, std::nullopt},
@@ -70,9 +64,7 @@ void TarnReportingSnareWorkerInstanceAlarmLowRMS::fire(const TarnReportingSessio
 
 void TarnReportingSnareWorkerInstanceAlarmLowRMS::stop() {
   const std::optional<std::string> sessionId = workerState().currentSnareSessionIdentifier->get();
-  if (!sessionId) {
-    return;
-  }
+  if (!sessionId) return;
   kLog(LogLevel::Info, "Stop called. Cancelling Snare session for alarm Low RMS. sessionId=%@ timeout=%f", *sessionId,
        snareAlarmLowRmsDuration_);
   workerState().symptomReporter->cancelSession(*sessionId);

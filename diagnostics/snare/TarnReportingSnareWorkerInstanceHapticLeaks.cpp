@@ -39,9 +39,7 @@ void TarnReportingSnareWorkerInstanceHapticLeaks::fire(const TarnReportingSessio
   using Operations = TarnReportingSnareOperations;
   const std::shared_ptr<TarnReportingSession> owner = session();
   const std::shared_ptr<platform::SnareReporter> reporter = workerState().symptomReporter;
-  if (!owner) {
-    return;
-  }
+  if (!owner) return;
   const bool accepted = reporter->requestSnapshot(
       {Operations::signatureFromMessage(message, AudioServiceType::Haptics, *reporter, "Unknown"), kSnapshotSeconds,
        Operations::diagnosticPayload(*owner)},

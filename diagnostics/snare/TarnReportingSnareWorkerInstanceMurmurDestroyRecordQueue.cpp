@@ -8,9 +8,7 @@ namespace tarn {
 std::unique_ptr<TarnReportingSnareWorkerInstanceMurmurDestroyRecordQueue>
 TarnReportingSnareWorkerInstanceMurmurDestroyRecordQueue::initWithSession(
     const std::shared_ptr<TarnReportingSession>& session) {
-  if (session->isSingleMessageSession()) {
-    return nullptr;
-  }
+  if (session->isSingleMessageSession()) return nullptr;
   return std::make_unique<TarnReportingSnareWorkerInstanceMurmurDestroyRecordQueue>(
       session, std::make_shared<WorkerInstanceState>());
 }

@@ -1,6 +1,5 @@
 #include "diagnostics/snare/TarnReportingSnareWorkerInstanceSSSLeaks.h"
 
-#include <mutex>
 #include <optional>
 #include <utility>
 
@@ -55,11 +54,9 @@ bool TarnReportingSnareWorkerInstanceSSSLeaks::interestedInMessage(const TarnRep
 
 void TarnReportingSnareWorkerInstanceSSSLeaks::fire(const TarnReportingSessionMessage& message) {
   const std::shared_ptr<TarnReportingSession> owner = session();
-  if (!owner) {
-    return;
-  }
+  if (!owner) return;
   TarnReportingSnareProcessState::RateLimit& limit = processState_->systemSoundRateLimit();
-  const std::lock_guard guard(limit.lock);
+  const MutexLock guard(limit.lock);
   const double now = TarnReportingFacilities().clock.epochSeconds();
   if (firedRecently(limit.lastFire, now)) {
     kLog(LogLevel::Info, "Already fired TarnReportingSnareWorkerInstanceSSSLeaks recently.");

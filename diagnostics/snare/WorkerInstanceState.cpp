@@ -20,15 +20,11 @@ void WorkerInstanceState::count(double now) {
 }
 
 TarnReportingSnareVerdict WorkerInstanceState::verdict(double now) const {
-  if (interestedCount < interestThresholdCount) {
-    return TarnReportingSnareVerdict::TooFew;
-  }
+  if (interestedCount < interestThresholdCount) return TarnReportingSnareVerdict::TooFew;
   if (interestThresholdCount == 0) {
     // A clock that was set back makes the time negative, and the wait longer: better late than too often.
     const double elapsed = now - interestFirstSeen.get().value_or(now);
-    if (!(elapsed > interestThresholdDurationSeconds)) {
-      return TarnReportingSnareVerdict::TooSoon;
-    }
+    if (!(elapsed > interestThresholdDurationSeconds)) return TarnReportingSnareVerdict::TooSoon;
   }
   return firedCount != 0 && oncePerSession ? TarnReportingSnareVerdict::FiredBefore : TarnReportingSnareVerdict::Fire;
 }

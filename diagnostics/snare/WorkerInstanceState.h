@@ -12,12 +12,12 @@
 #include <cstdint>
 #include <limits>
 #include <memory>
-#include <mutex>
 #include <optional>
 #include <string>
 #include <utility>
 
 #include "plist/Dictionary.h"
+#include "plist/ThreadSafety.h"
 
 namespace tarn {
 
@@ -36,17 +36,17 @@ class TarnReportingSynchronized {
   TarnReportingSynchronized& operator=(const TarnReportingSynchronized&) = delete;
 
   std::optional<T> get() const {
-    const std::lock_guard guard(mutex_);
+    const MutexLock guard(mutex_);
     return value_;
   }
   void set(std::optional<T> value) {
-    const std::lock_guard guard(mutex_);
+    const MutexLock guard(mutex_);
     value_ = std::move(value);
   }
 
  private:
-  mutable std::mutex mutex_;
-  std::optional<T> value_;  // guarded by mutex_
+  mutable Mutex mutex_;
+  std::optional<T> value_ TARN_GUARDED_BY(mutex_);
 };
 
 // What the trigger rule says about an interesting message that has just been counted.
@@ -72,7 +72,7 @@ struct WorkerInstanceState {
   void count(double now);
   // Whether the message that was counted last fires at this time, in epoch seconds.
   TarnReportingSnareVerdict verdict(double now) const;
-  // Begins to count anew, as behind a fire. How often it fired is kept.
+  // Restarts the count, as after a fire. How often it fired is kept.
   void reset();
 
   // The capture that the service reported for the latest fire; never null.

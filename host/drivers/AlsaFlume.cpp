@@ -8,6 +8,7 @@
 #include "host/log/HostLog.h"
 #include "host/system/FolderNames.h"
 #include "host/system/SmallFile.h"
+#include "host/system/SystemError.h"
 
 namespace tarn::linux_host {
 
@@ -24,14 +25,10 @@ constexpr std::size_t kMaximumDigits = 4;
 
 // Whether it is the word, a number and, when there is one, one of the letters: "card0", "pcm12p".
 bool isNumbered(std::string_view name, std::string_view word, std::string_view letters = {}) {
-  if (!name.starts_with(word)) {
-    return false;
-  }
+  if (!name.starts_with(word)) return false;
   name.remove_prefix(word.size());
   if (!letters.empty()) {
-    if (name.empty() || letters.find(name.back()) == std::string_view::npos) {
-      return false;
-    }
+    if (name.empty() || letters.find(name.back()) == std::string_view::npos) return false;
     name.remove_suffix(1);
   }
   return !name.empty() && name.size() <= kMaximumDigits &&
@@ -45,17 +42,13 @@ bool isDigitalLink(std::string_view id) {
 }
 
 const char* groupOf(const AlsaInfo& info) {
-  if (!info.isPlayback) {
-    return "Tx";
-  }
+  if (!info.isPlayback) return "Tx";
   return isDigitalLink(info.id) ? "Rx" : "Speaker";
 }
 
 // How far a counter went that may have begun anew.
 std::uint64_t steps(const std::optional<std::uint64_t>& before, const std::optional<std::uint64_t>& now) {
-  if (!now) {
-    return 0;
-  }
+  if (!now) return 0;
   return before && *before <= *now ? *now - *before : *now;
 }
 
@@ -81,22 +74,20 @@ AlsaFlume::AlsaFlume(std::string folder, platform::Log& log, const platform::Clo
 FlumeSamples AlsaFlume::read() {
   FlumeSamples samples;
   SumsByPath sums;
-  std::map<std::string, std::string> complaints;
+  std::map<std::string, Error> complaints;
   for (const Substream& substream : substreams()) {
     const std::string path = substream.path();
-    std::string complaint = read(substream, sums, samples);
-    if (complaint.empty()) {
-      continue;
-    }
+    const Status taken = read(substream, sums, samples);
+    if (taken.ok()) continue;
     if (const auto before = sums_.find(path); before != sums_.end()) {
       sums.insert(*before);  // it may be readable again
     }
-    if (const auto before = complaints_.find(path); before == complaints_.end() || before->second != complaint) {
+    if (const auto before = complaints_.find(path); before == complaints_.end() || before->second != *taken) {
       std::string text = "driver channels: the substream ";
-      text.append(path).append(" ").append(complaint);
+      text.append(path).append(" ").append(taken->text);
       hostLog(log_, kDriverCategory, platform::LogLevel::Error, kModule, text);
     }
-    complaints.emplace(path, std::move(complaint));
+    complaints.emplace(path, *taken);
   }
   // Those of substreams that are gone go with them.
   sums_ = std::move(sums);
@@ -140,27 +131,25 @@ std::string AlsaFlume::cardName(const std::string& card) const {
   return name.empty() ? card : name;
 }
 
-std::string AlsaFlume::read(const Substream& substream, SumsByPath& sums, FlumeSamples& samples) const {
+Status AlsaFlume::read(const Substream& substream, SumsByPath& sums, FlumeSamples& samples) const {
   const std::string path = substream.path();
   const auto statusFile = readSmallFile(folder_ + "/" + path + "/status", kMaximumFileBytes);
   const auto infoFile = readSmallFile(folder_ + "/" + path + "/info", kMaximumFileBytes);
   if (statusFile.failed() || infoFile.failed()) {
-    return "can't be read" + errorSuffix(statusFile.failed() ? *statusFile.error : *infoFile.error);
+    return errorOf("can't be read", statusFile.failed() ? *statusFile.error : *infoFile.error);
   }
   const auto status = parseAlsaStatus(statusFile.value);
   const auto info = parseAlsaInfo(infoFile.value);
-  if (!status || !info) {
-    return status ? "tells no direction" : "tells no state";
-  }
+  if (!status || !info) return Error{0, status ? "tells no direction" : "tells no state"};
   const nanoseconds now = clock_.monotonic();
   const auto before = sums_.find(path);
   Sums& sum = sums.emplace(path, before == sums_.end() ? begun(*status, now) : before->second).first->second;
-  goOn(sum, *status, now);
+  advance(sum, *status, now);
 
   const platform::FlumeChannelName name{cardName(substream.card), groupOf(*info), substream.pcm,
                                         info->id.empty() ? substream.sub : info->id + " " + substream.sub};
   addChannels(name, sum, samples);
-  return "";
+  return {};
 }
 
 void AlsaFlume::addChannels(const platform::FlumeChannelName& substream, const Sums& sums, FlumeSamples& samples) {
@@ -189,7 +178,7 @@ AlsaFlume::Sums AlsaFlume::begun(const AlsaStatus& status, nanoseconds now) {
   return sums;
 }
 
-void AlsaFlume::goOn(Sums& sums, const AlsaStatus& status, nanoseconds now) {
+void AlsaFlume::advance(Sums& sums, const AlsaStatus& status, nanoseconds now) {
   const nanoseconds passed = std::max(now - sums.lastReading, nanoseconds(0));
   const bool triggered = status.triggerNanoseconds != sums.last.triggerNanoseconds;
   const bool changed = status.state != sums.last.state;

@@ -35,6 +35,7 @@
 #include "host/drivers/FlumeSource.h"
 #include "platform/Clock.h"
 #include "platform/Log.h"
+#include "plist/Result.h"
 
 namespace tarn::linux_host {
 
@@ -69,18 +70,18 @@ class AlsaFlume final : public FlumeSource {
 
   std::vector<Substream> substreams();
   std::string cardName(const std::string& card) const;
-  // Adds the substream's channels; what is wrong, empty when nothing is.
-  std::string read(const Substream& substream, SumsByPath& sums, platform::FlumeSamples& samples) const;
+  // Adds the substream's channels. An error is the complaint about it.
+  Status read(const Substream& substream, SumsByPath& sums, platform::FlumeSamples& samples) const;
   static void addChannels(const platform::FlumeChannelName& substream, const Sums& sums,
                           platform::FlumeSamples& samples);
   static Sums begun(const AlsaStatus& status, std::chrono::nanoseconds now);
-  static void goOn(Sums& sums, const AlsaStatus& status, std::chrono::nanoseconds now);
+  static void advance(Sums& sums, const AlsaStatus& status, std::chrono::nanoseconds now);
 
   const std::string folder_;
   platform::Log& log_;
   const platform::Clock& clock_;
-  SumsByPath sums_;                                // of the substreams of the last reading
-  std::map<std::string, std::string> complaints_;  // likewise, by path
+  SumsByPath sums_;                          // of the substreams of the last reading
+  std::map<std::string, Error> complaints_;  // likewise, by path
   bool toldBounds_ = false;
 };
 

@@ -16,9 +16,7 @@ constexpr std::uint64_t kMaximumSeconds = std::numeric_limits<std::int64_t>::max
 std::string_view trimmed(std::string_view text) {
   constexpr std::string_view kBlanks = " \t\r";
   const std::size_t first = text.find_first_not_of(kBlanks);
-  if (first == std::string_view::npos) {
-    return {};
-  }
+  if (first == std::string_view::npos) return {};
   return text.substr(first, text.find_last_not_of(kBlanks) - first + 1);
 }
 
@@ -47,9 +45,7 @@ std::optional<std::int64_t> nanoseconds(std::string_view text) {
   const std::string_view behind = text.substr(std::min(point + 1, text.size()));
   const auto seconds = wholeNumber(text.substr(0, point));
   const auto fraction = wholeNumber(behind);
-  if (!seconds || *seconds > kMaximumSeconds || !fraction || behind.size() != 9) {
-    return std::nullopt;
-  }
+  if (!seconds || *seconds > kMaximumSeconds || !fraction || behind.size() != 9) return std::nullopt;
   const std::int64_t moment =
       static_cast<std::int64_t>(*seconds) * kNanosecondsPerSecond + static_cast<std::int64_t>(*fraction);
   return moment == 0 ? std::nullopt : std::optional(moment);
@@ -57,9 +53,7 @@ std::optional<std::int64_t> nanoseconds(std::string_view text) {
 
 std::size_t stateOf(std::string_view name) {
   for (std::size_t state = 0; state < kAlsaStateCount; ++state) {
-    if (kAlsaStates[state] == name) {
-      return state;
-    }
+    if (kAlsaStates[state] == name) return state;
   }
   return kAlsaStateCount - 1;
 }

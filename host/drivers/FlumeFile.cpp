@@ -8,6 +8,7 @@
 #include <utility>
 
 #include "host/system/JsonValues.h"
+#include "host/system/SystemError.h"
 #include "plist/Dictionary.h"
 #include "plist/EscapedText.h"
 
@@ -20,8 +21,9 @@ using platform::FlumeState;
 
 namespace {
 
-// What is wrong; empty when nothing is.
-using Complaint = std::string;
+Error wrong(std::string text) {
+  return {0, std::move(text)};
+}
 
 constexpr std::size_t kMaximumNameInComplaint = 80;
 
@@ -32,9 +34,7 @@ constexpr std::array<std::pair<std::string_view, FlumeFormat>, 4> kFormats{{{"si
 
 std::optional<FlumeFormat> formatOf(const plist::ValueView& value) {
   for (const auto& [name, format] : kFormats) {
-    if (value.isText() && value.text() == name) {
-      return format;
-    }
+    if (value.isText() && value.text() == name) return format;
   }
   return std::nullopt;
 }
@@ -70,9 +70,9 @@ bool take(const plist::ValueView& value, std::optional<std::string>& text) {
   return value.isText() || !value.present();
 }
 
-Complaint takeBuckets(const plist::ValueView& value, const FlumeFileBounds& bounds, FlumeChannel& channel) {
+Status takeBuckets(const plist::ValueView& value, const FlumeFileBounds& bounds, FlumeChannel& channel) {
   if (value.kind() != plist::Kind::Array || value.array().size() > bounds.buckets) {
-    return "\"buckets\" must be a list of at most " + std::to_string(bounds.buckets) + " buckets";
+    return wrong("\"buckets\" must be a list of at most " + std::to_string(bounds.buckets) + " buckets");
   }
   const plist::Array list = value.array();
   for (const plist::ValueView& item : list) {
@@ -80,16 +80,16 @@ Complaint takeBuckets(const plist::ValueView& value, const FlumeFileBounds& boun
     FlumeBucket bucket;
     if (numbers.size() != 3 || !take(numbers[0], bucket.lower) || !take(numbers[1], bucket.upper) ||
         !take(numbers[2], bucket.hits) || bucket.hits < 0) {
-      return "a bucket must be [lower, upper, hits]";
+      return wrong("a bucket must be [lower, upper, hits]");
     }
     channel.buckets.push_back(bucket);
   }
-  return "";
+  return {};
 }
 
-Complaint takeStates(const plist::ValueView& value, const FlumeFileBounds& bounds, FlumeChannel& channel) {
+Status takeStates(const plist::ValueView& value, const FlumeFileBounds& bounds, FlumeChannel& channel) {
   if (value.kind() != plist::Kind::Array || value.array().size() > bounds.states) {
-    return "\"states\" must be a list of at most " + std::to_string(bounds.states) + " states";
+    return wrong("\"states\" must be a list of at most " + std::to_string(bounds.states) + " states");
   }
   const plist::Array list = value.array();
   std::set<std::string> names;
@@ -99,24 +99,22 @@ Complaint takeStates(const plist::ValueView& value, const FlumeFileBounds& bound
     FlumeState state;
     if (!name.isText() || !take(members["transitions"], state.transitions) ||
         !take(members["residency"], state.residency) || !take(members["duty_cycle"], state.dutyCycle)) {
-      return R"(a state must have "name", "transitions", "residency" and "duty_cycle")";
+      return wrong(R"(a state must have "name", "transitions", "residency" and "duty_cycle")");
     }
     state.name = std::string(name.text());
-    if (!names.insert(state.name).second) {
-      return "a state stands twice";
-    }
+    if (!names.insert(state.name).second) return wrong("a state stands twice");
     channel.states.push_back(std::move(state));
   }
-  return "";
+  return {};
 }
 
-Complaint takeNumbers(const plist::Dictionary& members, const FlumeFileBounds& bounds, FlumeChannel& channel) {
+Status takeNumbers(const plist::Dictionary& members, const FlumeFileBounds& bounds, FlumeChannel& channel) {
   switch (channel.format) {
     case FlumeFormat::Simple:
-      return take(members["value"], channel.value) ? "" : "\"value\" must be a whole number";
+      return take(members["value"], channel.value) ? Status() : wrong("\"value\" must be a whole number");
     case FlumeFormat::Histogram:
       if (!take(members["min"], channel.minimum) || !take(members["max"], channel.maximum)) {
-        return R"("min" and "max" must be whole numbers)";
+        return wrong(R"("min" and "max" must be whole numbers)");
       }
       return takeBuckets(members["buckets"], bounds, channel);
     case FlumeFormat::State:
@@ -125,97 +123,86 @@ Complaint takeNumbers(const plist::Dictionary& members, const FlumeFileBounds& b
     case FlumeFormat::SimpleArray:
       break;
   }
-  return "";
+  return {};
 }
 
-Complaint takeChannel(const plist::ValueView& item, const FlumeFileBounds& bounds, FlumeChannel& channel) {
+Status takeChannel(const plist::ValueView& item, const FlumeFileBounds& bounds, FlumeChannel& channel) {
   const plist::Dictionary members = item.kind() == plist::Kind::Dictionary ? item.dictionary() : plist::Dictionary();
-  if (!members["name"].isText()) {
-    return "\"name\" must be a text";
-  }
+  if (!members["name"].isText()) return wrong("\"name\" must be a text");
   channel.name.name = std::string(members["name"].text());
   const std::optional<FlumeFormat> format = formatOf(members["format"]);
-  if (!format) {
-    return "\"format\" must be simple, histogram, state or simplearray";
-  }
+  if (!format) return wrong("\"format\" must be simple, histogram, state or simplearray");
   channel.format = *format;
-  if (!take(members["unit"], channel.unit)) {
-    return "\"unit\" must be a text";
-  }
+  if (!take(members["unit"], channel.unit)) return wrong("\"unit\" must be a text");
   return takeNumbers(members, bounds, channel);
 }
 
 // Keeps the first complaint and counts the others.
 class Complaints {
  public:
-  void add(std::size_t number, const FlumeChannel& channel, const Complaint& complaint) {
-    if (count_++ > 0) {
-      return;
-    }
+  void add(std::size_t number, const FlumeChannel& channel, const Error& complaint) {
+    if (count_++ > 0) return;
     first_ = "channel " + std::to_string(number);
     if (channel.name.name && channel.name.name->size() <= kMaximumNameInComplaint) {
       first_ += " \"";
       plist::appendEscapedControls(first_, *channel.name.name);
       first_ += '"';
     }
-    first_ += ": " + complaint;
+    first_ += errorSuffix(complaint);
   }
-  std::string text() const { return count_ > 1 ? first_ + " (" + std::to_string(count_ - 1) + " more)" : first_; }
+  Status status() const {
+    if (count_ == 0) return {};
+    return wrong(count_ > 1 ? first_ + " (" + std::to_string(count_ - 1) + " more)" : first_);
+  }
 
  private:
   std::string first_;
   std::size_t count_ = 0;
 };
 
-FlumeFileReading takeChannels(const plist::Array& list, const platform::FlumeChannelName& driver,
-                              const FlumeFileBounds& bounds) {
-  FlumeFileReading reading;
+Result<platform::FlumeSamples> takeChannels(const plist::Array& list, const platform::FlumeChannelName& driver,
+                                            const FlumeFileBounds& bounds) {
+  Result<platform::FlumeSamples> reading;
   Complaints complaints;
   std::set<std::string> names;
   std::size_t number = 0;
   for (const plist::ValueView& item : list) {
     FlumeChannel channel;
     channel.name = driver;
-    Complaint complaint;
+    Status taken;
     if (++number > bounds.channels) {
-      complaint = "a file has at most " + std::to_string(bounds.channels) + " channels";
+      taken = wrong("a file has at most " + std::to_string(bounds.channels) + " channels");
     } else {
-      complaint = takeChannel(item, bounds, channel);
+      taken = takeChannel(item, bounds, channel);
     }
-    if (complaint.empty() && !names.insert(*channel.name.name).second) {
-      complaint = "the channel stands twice";
+    if (taken.ok() && !names.insert(*channel.name.name).second) {
+      taken = wrong("the channel stands twice");
     }
-    if (complaint.empty()) {
-      reading.channels.push_back(std::move(channel));
+    if (taken.ok()) {
+      reading.value.push_back(std::move(channel));
     } else {
-      complaints.add(number, channel, complaint);
+      complaints.add(number, channel, *taken);
     }
   }
-  reading.complaint = complaints.text();
+  reading.error = complaints.status();
   return reading;
 }
 
 }  // namespace
 
-FlumeFileReading parseFlumeFile(std::string_view text, const FlumeFileBounds& bounds) {
+Result<platform::FlumeSamples> parseFlumeFile(std::string_view text, const FlumeFileBounds& bounds) {
   const JsonReading json = readJson(text, kMaximumJsonNesting, JsonNull::Absent);
-  if (json.fault) {
-    return {{}, json.fault->description()};
-  }
-  if (json.value.kind() != plist::Kind::Dictionary) {
-    return {{}, "must be an object"};
-  }
+  if (json.fault) return {{}, wrong(json.fault->description())};
+  if (json.value.kind() != plist::Kind::Dictionary) return {{}, wrong("must be an object")};
   const plist::Dictionary members = json.value.view().dictionary();
   platform::FlumeChannelName driver;
   if (!members["driver"].isText() || !take(members["driver"], driver.driver)) {
-    return {{}, "\"driver\" must be a text"};
+    return {{}, wrong("\"driver\" must be a text")};
   }
   if (!take(members["group"], driver.group) || !take(members["subgroup"], driver.subGroup)) {
-    return {{}, R"("group" and "subgroup" must be texts)"};
+    return {{}, wrong(R"("group" and "subgroup" must be texts)")};
   }
-  if (members["channels"].kind() != plist::Kind::Array) {
-    return {{}, "\"channels\" must be a list"};
-  }
+  if (members["channels"].kind() != plist::Kind::Array) return {{}, wrong("\"channels\" must be a list")};
   return takeChannels(members["channels"].array(), driver, bounds);
 }
 

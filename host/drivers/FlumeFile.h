@@ -16,10 +16,10 @@
 #pragma once
 
 #include <cstddef>
-#include <string>
 #include <string_view>
 
 #include "platform/FlumeService.h"
+#include "plist/Result.h"
 
 namespace tarn::linux_host {
 
@@ -29,11 +29,8 @@ struct FlumeFileBounds {
   std::size_t states = 256;     // of a state channel; one with more is wrong
 };
 
-struct FlumeFileReading {
-  platform::FlumeSamples channels;  // in the file's order, no two known alike
-  std::string complaint;            // the first thing that is wrong, and how many more there are; empty: nothing
-};
-
-FlumeFileReading parseFlumeFile(std::string_view text, const FlumeFileBounds& bounds = {});
+// The channels in the file's order, no two known alike. An error tells the first thing that is wrong, and how many more
+// there are; the channels that are right stand beside it.
+Result<platform::FlumeSamples> parseFlumeFile(std::string_view text, const FlumeFileBounds& bounds = {});
 
 }  // namespace tarn::linux_host

@@ -9,6 +9,7 @@
 #include "host/log/HostLog.h"
 #include "host/system/FolderNames.h"
 #include "host/system/SmallFile.h"
+#include "host/system/SystemError.h"
 #include "plist/EscapedText.h"
 
 namespace tarn::linux_host {
@@ -19,7 +20,15 @@ namespace {
 
 constexpr std::string_view kModule = "FlumeFiles";
 constexpr std::string_view kSuffix = ".json";
-constexpr const char* kGone = "is missing";
+
+Error gone() {
+  return {ENOENT, "is missing"};
+}
+
+// Why a file or folder can't be read.
+Error unreadable(const Error& error) {
+  return error.code == ENOENT ? gone() : errorOf("can't be read", error);
+}
 
 bool isChannelFile(std::string_view name) {
   return name.size() > kSuffix.size() && name.ends_with(kSuffix) && !name.starts_with('.');
@@ -35,62 +44,54 @@ FlumeSamples FlumeFiles::read() {
   Complaints now;
   const auto found = folderNames(folder_, bounds_.files, isChannelFile);
   if (found.failed() && found.error->code != ENOENT) {
-    now[""] = "can't be read" + errorSuffix(*found.error);
+    now[""] = unreadable(*found.error);
   } else if (!found.value.complete) {
-    now[""] = "holds more than " + std::to_string(bounds_.files) + " files, the others are left out";
+    now[""] = Error{0, "holds more than " + std::to_string(bounds_.files) + " files, the others are left out"};
   }
   for (const std::string& name : found.value.names) {
-    std::string complaint = readFile(name, gathered);
+    Status read = readFile(name, gathered);
     // One that went while we looked is like one that wasn't there, unless it was there before.
-    if (complaint != kGone || last_.contains(name)) {
-      now[name] = std::move(complaint);
+    if (read.code() != ENOENT || last_.contains(name)) {
+      now[name] = std::move(read);
     }
   }
   if (!now.contains("")) {  // or it may be there all the same
     for (const auto& [name, complaint] : last_) {
       if (!name.empty()) {
-        now.emplace(name, kGone);
+        now.emplace(name, gone());
       }
     }
   }
   tell(now);
   // What is gone was told and is forgotten.
-  std::erase_if(now, [](const auto& each) { return each.second == kGone; });
+  std::erase_if(now, [](const auto& each) { return each.second.code() == ENOENT; });
   last_ = std::move(now);
   return {std::make_move_iterator(gathered.channels.begin()), std::make_move_iterator(gathered.channels.end())};
 }
 
-// Adds the file's channels; its complaint, empty when there is none.
-std::string FlumeFiles::readFile(const std::string& name, Gathered& gathered) const {
+// Adds the file's channels. An error is the complaint about it.
+Status FlumeFiles::readFile(const std::string& name, Gathered& gathered) const {
   const std::string path = folder_ + "/" + name;
   struct stat facts {};
   // Looked at before it is opened: opening a device can do something.
-  if (::stat(path.c_str(), &facts) != 0) {
-    return errno == ENOENT ? kGone : "can't be read" + errorSuffix(errno);
-  }
-  if (!S_ISREG(facts.st_mode)) {
-    return "is not a plain file";
-  }
+  if (::stat(path.c_str(), &facts) != 0) return unreadable(lastSystemError());
+  if (!S_ISREG(facts.st_mode)) return Error{0, "is not a plain file"};
   const auto [content, error] = readSmallFile(path, bounds_.fileBytes);
-  if (error && error->code == EFBIG) {
-    return "is larger than " + std::to_string(bounds_.fileBytes) + " bytes";
-  }
-  if (error) {
-    return error->code == ENOENT ? kGone : "can't be read" + errorSuffix(*error);
-  }
+  if (error.code() == EFBIG) return Error{EFBIG, "is larger than " + std::to_string(bounds_.fileBytes) + " bytes"};
+  if (error.failed()) return unreadable(*error);
   gathered.bytes += content.size();
   if (gathered.bytes > bounds_.bytes) {
-    return "is left out: there are more than " + std::to_string(bounds_.bytes) + " bytes of files";
+    return Error{0, "is left out: there are more than " + std::to_string(bounds_.bytes) + " bytes of files"};
   }
   return takeChannels(parseFlumeFile(content, bounds_.file), gathered);
 }
 
-std::string FlumeFiles::takeChannels(FlumeFileReading reading, Gathered& gathered) const {
-  if (gathered.channels.size() + reading.channels.size() > bounds_.channels) {
-    return "is left out: there are more than " + std::to_string(bounds_.channels) + " channels";
+Status FlumeFiles::takeChannels(Result<FlumeSamples> reading, Gathered& gathered) const {
+  if (gathered.channels.size() + reading.value.size() > bounds_.channels) {
+    return Error{0, "is left out: there are more than " + std::to_string(bounds_.channels) + " channels"};
   }
   std::size_t doubles = 0;
-  for (platform::FlumeChannel& channel : reading.channels) {
+  for (platform::FlumeChannel& channel : reading.value) {
     if (gathered.names.contains(&channel.name)) {
       ++doubles;
     } else {
@@ -98,26 +99,26 @@ std::string FlumeFiles::takeChannels(FlumeFileReading reading, Gathered& gathere
       gathered.names.insert(&gathered.channels.back().name);
     }
   }
-  if (reading.complaint.empty() && doubles > 0) {
-    return "holds " + std::to_string(doubles) + " channels that an earlier file has";
+  if (reading.ok() && doubles > 0) {
+    return Error{0, "holds " + std::to_string(doubles) + " channels that an earlier file has"};
   }
-  return std::move(reading.complaint);
+  return std::move(reading.error);
 }
 
 void FlumeFiles::tell(const Complaints& now) const {
   for (const auto& [name, complaint] : now) {
     const auto before = last_.find(name);
-    if (!complaint.empty() && (before == last_.end() || before->second != complaint)) {
-      complain(name, complaint);
+    if (complaint.failed() && (before == last_.end() || before->second != complaint)) {
+      complain(name, *complaint);
     }
   }
 }
 
-void FlumeFiles::complain(const std::string& name, const std::string& complaint) const {
+void FlumeFiles::complain(const std::string& name, const Error& complaint) const {
   std::string text = name.empty() ? "driver channels: the folder " : "driver channels: the file ";
   plist::appendEscapedControls(text, name.empty() ? folder_ : name);
   text += ' ';
-  text += complaint;
+  text += complaint.text;
   hostLog(log_, kDriverCategory, platform::LogLevel::Error, kModule, text);
 }
 

@@ -22,6 +22,7 @@
 #include "host/drivers/FlumeFile.h"
 #include "host/drivers/FlumeSource.h"
 #include "platform/Log.h"
+#include "plist/Result.h"
 
 namespace tarn::linux_host {
 
@@ -45,7 +46,7 @@ class FlumeFiles final : public FlumeSource {
  private:
   // By the file's name, those of files that held channels or a complaint at the last reading; the empty name is the
   // folder.
-  using Complaints = std::map<std::string, std::string>;
+  using Complaints = std::map<std::string, Status>;
 
   // What one reading has gathered. The names lie in the channels, which don't move.
   struct Gathered {
@@ -54,10 +55,10 @@ class FlumeFiles final : public FlumeSource {
     std::size_t bytes = 0;
   };
 
-  std::string readFile(const std::string& name, Gathered& gathered) const;
-  std::string takeChannels(FlumeFileReading reading, Gathered& gathered) const;
+  Status readFile(const std::string& name, Gathered& gathered) const;
+  Status takeChannels(Result<platform::FlumeSamples> reading, Gathered& gathered) const;
   void tell(const Complaints& now) const;
-  void complain(const std::string& name, const std::string& complaint) const;
+  void complain(const std::string& name, const Error& complaint) const;
 
   const std::string folder_;
   platform::Log& log_;

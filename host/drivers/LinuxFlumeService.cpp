@@ -67,9 +67,7 @@ void subtract(std::vector<FlumeState>& later, const std::vector<FlumeState>& ear
 }
 
 void subtract(FlumeChannel& later, const FlumeChannel& earlier) {
-  if (later.format != earlier.format) {
-    return;
-  }
+  if (later.format != earlier.format) return;
   later.value = difference(later.value, earlier.value);
   for (std::size_t i = 0; i < std::min(later.buckets.size(), earlier.buckets.size()); ++i) {
     later.buckets[i].hits = grown(later.buckets[i].hits, earlier.buckets[i].hits);
@@ -81,7 +79,7 @@ void subtract(FlumeChannel& later, const FlumeChannel& earlier) {
 
 LinuxFlumeService::LinuxFlumeService(std::vector<FlumeSource*> sources) : sources_(std::move(sources)) {}
 
-platform::Outcome<std::shared_ptr<const FlumeChannelSet>> LinuxFlumeService::copyChannels(
+Result<std::shared_ptr<const FlumeChannelSet>> LinuxFlumeService::copyChannels(
     const std::optional<std::string>& group, const std::optional<std::string>& subGroup) {
   const Reading reading(sources_);
   auto set = std::make_shared<FlumeChannelSet>();
@@ -101,8 +99,8 @@ platform::FlumeService::Subscribed LinuxFlumeService::subscribe(const FlumeChann
   return {std::make_shared<platform::FlumeSubscription>(), std::make_shared<const FlumeChannelSet>(channels), {}};
 }
 
-platform::FlumeService::SamplesOutcome LinuxFlumeService::createSamples(platform::FlumeSubscription&,
-                                                                        const FlumeChannelSet& subscribedChannels) {
+platform::FlumeService::SamplesResult LinuxFlumeService::createSamples(platform::FlumeSubscription&,
+                                                                       const FlumeChannelSet& subscribedChannels) {
   const Reading reading(sources_);
   auto samples = std::make_shared<FlumeSamples>();
   for (const platform::FlumeChannelName& name : subscribedChannels) {
@@ -113,11 +111,9 @@ platform::FlumeService::SamplesOutcome LinuxFlumeService::createSamples(platform
   return {std::move(samples), {}};
 }
 
-platform::FlumeService::SamplesOutcome LinuxFlumeService::createDelta(
-    const std::shared_ptr<const FlumeSamples>& earlier, const std::shared_ptr<const FlumeSamples>& later) {
-  if (earlier == nullptr || later == nullptr) {
-    return {later, {}};
-  }
+platform::FlumeService::SamplesResult LinuxFlumeService::createDelta(const std::shared_ptr<const FlumeSamples>& earlier,
+                                                                     const std::shared_ptr<const FlumeSamples>& later) {
+  if (earlier == nullptr || later == nullptr) return {later, {}};
   FlumeChannelIndex before;
   addTo(before, *earlier);
   auto delta = std::make_shared<FlumeSamples>(*later);

@@ -25,13 +25,13 @@ class LinuxFlumeService final : public platform::FlumeService {
  public:
   explicit LinuxFlumeService(std::vector<FlumeSource*> sources);
 
-  platform::Outcome<std::shared_ptr<const platform::FlumeChannelSet>> copyChannels(
+  Result<std::shared_ptr<const platform::FlumeChannelSet>> copyChannels(
       const std::optional<std::string>& group, const std::optional<std::string>& subGroup) override;
   Subscribed subscribe(const platform::FlumeChannelSet& channels) override;
-  SamplesOutcome createSamples(platform::FlumeSubscription& subscription,
-                               const platform::FlumeChannelSet& subscribedChannels) override;
-  SamplesOutcome createDelta(const std::shared_ptr<const platform::FlumeSamples>& earlier,
-                             const std::shared_ptr<const platform::FlumeSamples>& later) override;
+  SamplesResult createSamples(platform::FlumeSubscription& subscription,
+                              const platform::FlumeChannelSet& subscribedChannels) override;
+  SamplesResult createDelta(const std::shared_ptr<const platform::FlumeSamples>& earlier,
+                            const std::shared_ptr<const platform::FlumeSamples>& later) override;
 
  private:
   const std::vector<FlumeSource*> sources_;

@@ -12,12 +12,10 @@ namespace tarn::linux_host {
 FileLog::FileLog(std::string path, const platform::Clock& clock, platform::LogLevel threshold)
     : LineLog(clock, threshold), path_(std::move(path)) {}
 
-platform::MaybeError FileLog::open() {
+Status FileLog::open() {
   UniqueDescriptor opened(::open(path_.c_str(), O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC | O_NOCTTY, 0640));
   struct stat facts {};
-  if (!opened || ::fstat(opened.get(), &facts) != 0) {
-    return lastSystemError();
-  }
+  if (!opened || ::fstat(opened.get(), &facts) != 0) return lastSystemError();
   file_ = std::move(opened);
   device_ = facts.st_dev;
   inode_ = facts.st_ino;
@@ -27,13 +25,9 @@ platform::MaybeError FileLog::open() {
 int FileLog::descriptor() {
   struct stat facts {};
   const bool same = file_ && ::stat(path_.c_str(), &facts) == 0 && facts.st_dev == device_ && facts.st_ino == inode_;
-  if (same) {
-    return file_.get();
-  }
+  if (same) return file_.get();
   const auto error = open();
-  if (!error) {
-    return file_.get();
-  }
+  if (error.ok()) return file_.get();
   // A file that was only renamed still takes the line; one that was removed would swallow it.
   const bool kept = file_ && ::fstat(file_.get(), &facts) == 0 && facts.st_nlink > 0;
   return kept ? file_.get() : -static_cast<int>(error->code);

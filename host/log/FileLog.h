@@ -8,7 +8,7 @@
 
 #include "host/log/LineLog.h"
 #include "host/system/UniqueDescriptor.h"
-#include "platform/Outcome.h"
+#include "plist/Result.h"
 
 namespace tarn::linux_host {
 
@@ -18,7 +18,7 @@ class FileLog final : public LineLog {
 
   // Opens the file, made with mode 0640 when it isn't there. Called before the sink is used, to
   // learn early whether it can be.
-  [[nodiscard]] platform::MaybeError open();
+  [[nodiscard]] Status open();
 
  private:
   int descriptor() override;

@@ -6,9 +6,7 @@ namespace tarn::linux_host {
 
 void hostLog(platform::Log& log, const platform::LogCategory& category, platform::LogLevel level,
              std::string_view module, std::string_view text, int line) {
-  if (level < log.threshold()) {
-    return;
-  }
+  if (level < log.threshold()) return;
   log.write({category, level, module, line, prefixed(module, text, line)});
 }
 

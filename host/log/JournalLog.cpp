@@ -26,11 +26,11 @@ JournalLog::JournalLog(platform::LogLevel threshold, Send send) : send_(send != 
 }
 
 // Asked beforehand because the journal's own call reports success when there is nobody to take the entry.
-platform::MaybeError JournalLog::unavailable() {
+Status JournalLog::unavailable() {
   struct stat facts {};
   if (::stat(kJournalSocket, &facts) != 0) {
     const int error = errno;
-    return platform::PlatformError{error, kJournalSocket + errorSuffix(error)};
+    return Error{error, kJournalSocket + errorSuffix(error)};
   }
   return {};
 }

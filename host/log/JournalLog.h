@@ -17,8 +17,8 @@
 #include <string>
 
 #include "platform/Log.h"
-#include "platform/Outcome.h"
 #include "platform/ThreadSafety.h"
+#include "plist/Result.h"
 
 namespace tarn::linux_host {
 
@@ -33,7 +33,7 @@ class JournalLog final : public platform::Log {
   JournalLog& operator=(const JournalLog&) = delete;
 
   // What keeps the journal from taking entries on this machine; nothing when it is there.
-  static platform::MaybeError unavailable();
+  static Status unavailable();
 
   void write(const platform::LogEntry& entry) noexcept override;
 

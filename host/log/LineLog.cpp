@@ -56,9 +56,7 @@ int LineLog::writeLost() {
 // 0 or an errno value. A line after a torn one begins on a line of its own.
 int LineLog::writeWhole(std::string_view line) {
   const int target = descriptor();
-  if (target < 0) {
-    return -target;
-  }
+  if (target < 0) return -target;
   std::string mended;
   if (torn_) {
     mended = "\n";
@@ -71,18 +69,14 @@ int LineLog::writeWhole(std::string_view line) {
     return error;
   };
   while (!left.empty()) {
-    if (mayStall_ && !waitForRoom(target)) {
-      return failed(EAGAIN);
-    }
+    if (mayStall_ && !waitForRoom(target)) return failed(EAGAIN);
     // A pipe with any room takes this much, and no more than this in one piece.
     const ssize_t written =
         ::write(target, left.data(), mayStall_ ? std::min<std::size_t>(left.size(), PIPE_BUF) : left.size());
     if (written >= 0) {
       left.remove_prefix(static_cast<std::size_t>(written));
     } else if (errno == EAGAIN) {
-      if (!waitForRoom(target)) {
-        return failed(EAGAIN);
-      }
+      if (!waitForRoom(target)) return failed(EAGAIN);
     } else if (errno != EINTR) {
       return failed(errno);
     }

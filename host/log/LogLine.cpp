@@ -22,9 +22,7 @@ std::string_view logLevelName(platform::LogLevel level) noexcept {
 
 std::optional<platform::LogLevel> logLevelFromName(std::string_view name) noexcept {
   for (std::size_t index = 0; index < kLevelNames.size(); ++index) {
-    if (kLevelNames[index] == name) {
-      return static_cast<platform::LogLevel>(index);
-    }
+    if (kLevelNames[index] == name) return static_cast<platform::LogLevel>(index);
   }
   return std::nullopt;
 }

@@ -16,9 +16,7 @@ constexpr Seconds kLongestWait{86400.0 * 365};
 
 // What is not above zero, not-a-number included, does not wait.
 std::chrono::nanoseconds held(Seconds timeout) {
-  if (!(timeout > Seconds::zero())) {
-    return std::chrono::nanoseconds::zero();
-  }
+  if (!(timeout > Seconds::zero())) return std::chrono::nanoseconds::zero();
   return std::chrono::duration_cast<std::chrono::nanoseconds>(timeout < kLongestWait ? timeout : kLongestWait);
 }
 
@@ -75,9 +73,7 @@ std::shared_ptr<platform::Condition> LinuxConditions::makeCondition() {
 }
 
 std::shared_ptr<void> LinuxConditions::blockOnPurpose() {
-  if (!loop_.queue()->isCurrent()) {
-    return nullptr;
-  }
+  if (!loop_.queue()->isCurrent()) return nullptr;
   loop_.progress().beginWait(loop_.clock().monotonic());
   return {&loop_.progress(), [](QueueProgress* progress) { progress->endWait(); }};
 }

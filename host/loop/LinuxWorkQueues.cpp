@@ -41,9 +41,7 @@ LinuxWorkQueues::~LinuxWorkQueues() {
 std::shared_ptr<platform::WorkQueue> LinuxWorkQueues::makeSerialQueue(std::string_view name,
                                                                       platform::QualityOfService quality) {
   // By name alone: a worker's own queue must never be the one that the worker blocks.
-  if (name == kServerQueueName) {
-    return serverQueue_;
-  }
+  if (name == kServerQueueName) return serverQueue_;
   return makeSuspendableQueue(name, quality);
 }
 

@@ -5,7 +5,7 @@
 #include <cerrno>
 #include <utility>
 
-#include "host/log/HostLog.h"
+#include "host/system/SystemError.h"
 
 namespace tarn::linux_host {
 
@@ -21,9 +21,7 @@ std::uint64_t tokenOf(int descriptor, std::uint32_t generation) {
 // In whole milliseconds, rounded up so that nothing comes early; -1 stands for ever.
 int milliseconds(std::optional<std::chrono::nanoseconds> timeout) {
   constexpr std::chrono::nanoseconds kLongest = std::chrono::hours(1);
-  if (!timeout) {
-    return -1;
-  }
+  if (!timeout) return -1;
   return static_cast<int>(std::chrono::ceil<std::chrono::milliseconds>(std::min(*timeout, kLongest)).count());
 }
 
@@ -35,13 +33,13 @@ MainLoop::MainLoop(const platform::Clock& clock)
   event.events = EPOLLIN;
   event.data.u64 = tokenOf(queue_->wakeDescriptor(), 0);
   if (!epoll_ || ::epoll_ctl(epoll_.get(), EPOLL_CTL_ADD, queue_->wakeDescriptor(), &event) != 0) {
-    startError_ = "can't set up the main loop" + errorSuffix(errno);
+    setUp_ = errorOf("can't set up the main loop", errno);
   }
 }
 
 MainLoop::~MainLoop() = default;
 
-bool MainLoop::watch(int descriptor, std::uint32_t events, std::shared_ptr<EventHandler> handler) {
+Status MainLoop::watch(int descriptor, std::uint32_t events, std::shared_ptr<EventHandler> handler) {
   const auto index = static_cast<std::size_t>(descriptor);
   if (index >= slots_.size()) {
     slots_.resize(index + 1);
@@ -50,11 +48,9 @@ bool MainLoop::watch(int descriptor, std::uint32_t events, std::shared_ptr<Event
   epoll_event event{};
   event.events = events;
   event.data.u64 = tokenOf(descriptor, ++slot.generation);
-  if (::epoll_ctl(epoll_.get(), EPOLL_CTL_ADD, descriptor, &event) != 0) {
-    return false;
-  }
+  if (::epoll_ctl(epoll_.get(), EPOLL_CTL_ADD, descriptor, &event) != 0) return lastSystemError();
   slot.handler = std::move(handler);
-  return true;
+  return {};
 }
 
 void MainLoop::change(int descriptor, std::uint32_t events) {
@@ -106,16 +102,12 @@ void MainLoop::waitForEvents() {
 }
 
 void MainLoop::waitUntil(std::chrono::nanoseconds deadline, platform::UniqueFunction<bool()> isOver) {
-  if (std::exchange(waits_, true)) {
-    return;
-  }
+  if (std::exchange(waits_, true)) return;
   const WorkLane::Scope nobodys(nullptr);  // what comes meanwhile isn't the work of whoever waits
   while (!isOver() && !stopping_.load(std::memory_order_relaxed)) {
     flushAll();
     const auto left = deadline - clock_.monotonic();
-    if (left <= std::chrono::nanoseconds::zero()) {
-      break;
-    }
+    if (left <= std::chrono::nanoseconds::zero()) break;
     if (queue_->prepareToWait()) {
       Events events;
       const std::size_t count = sleep(events, left);

@@ -20,13 +20,13 @@
 #include <memory>
 #include <optional>
 #include <span>
-#include <string>
 #include <vector>
 
 #include "host/loop/QueueProgress.h"
 #include "host/loop/ServerQueue.h"
 #include "host/system/UniqueDescriptor.h"
 #include "platform/Clock.h"
+#include "plist/Result.h"
 
 namespace tarn::linux_host {
 
@@ -51,16 +51,16 @@ class MainLoop {
   MainLoop& operator=(const MainLoop&) = delete;
   ~MainLoop();
 
-  // Why the loop can't run (the system had no descriptors left); empty when it can.
-  const std::string& startError() const noexcept { return startError_; }
+  // Whether the loop can run; it can't when the system had no descriptors left.
+  const Status& setUp() const noexcept { return setUp_; }
 
   const std::shared_ptr<ServerQueue>& queue() const noexcept { return queue_; }
   QueueProgress& progress() noexcept { return progress_; }
   const platform::Clock& clock() const noexcept { return clock_; }
 
-  // Calls the handler for these events of the descriptor until unwatch(). Whether the system took it. A descriptor is
-  // unwatched before it is closed.
-  [[nodiscard]] bool watch(int descriptor, std::uint32_t events, std::shared_ptr<EventHandler> handler);
+  // Calls the handler for these events of the descriptor until unwatch(). Fails when the system doesn't take it. A
+  // descriptor is unwatched before it is closed.
+  [[nodiscard]] Status watch(int descriptor, std::uint32_t events, std::shared_ptr<EventHandler> handler);
   void change(int descriptor, std::uint32_t events);
   void unwatch(int descriptor);
 
@@ -99,7 +99,7 @@ class MainLoop {
   QueueProgress progress_;
   std::shared_ptr<ServerQueue> queue_;
   UniqueDescriptor epoll_;
-  std::string startError_;
+  Status setUp_;
   std::atomic<bool> stopping_{false};
   bool waits_ = false;
 

@@ -67,7 +67,7 @@ void ServerQueue::wake() {
   bool wakeServer = false;
   {
     const platform::MutexLock lock(mutex_);
-    lookAround_ = true;
+    woken_ = true;
     wakeServer = mustWake();
   }
   if (wakeServer) {
@@ -106,9 +106,7 @@ void ServerQueue::asyncNext(platform::Work rest) {
 // Work of the queue's own list has no turn that could end.
 bool ServerQueue::spend(std::size_t cost) {
   WorkLane* const lane = WorkLane::currentOf(this);
-  if (lane == nullptr) {
-    return false;
-  }
+  if (lane == nullptr) return false;
   lane->spend(cost);
   if (shouldPause_ && shouldPause_()) {
     lane->endTurn();
@@ -147,20 +145,14 @@ bool ServerQueue::refill() {
 
 std::optional<std::chrono::nanoseconds> ServerQueue::prepareToSleep() {
   using std::chrono::nanoseconds;
-  if (ready() != 0) {
-    return nanoseconds::zero();
-  }
+  if (ready() != 0) return nanoseconds::zero();
   const platform::MutexLock lock(mutex_);
-  if (ready() != 0 || std::exchange(lookAround_, false)) {
-    return nanoseconds::zero();
-  }
+  if (ready() != 0 || std::exchange(woken_, false)) return nanoseconds::zero();
   std::optional<nanoseconds> timeout;
   sleepsUntil_ = nanoseconds::max();
   if (!delayed_.empty()) {
     const auto now = clock_.monotonic();
-    if (delayed_.due(now)) {
-      return nanoseconds::zero();
-    }
+    if (delayed_.due(now)) return nanoseconds::zero();
     sleepsUntil_ = delayed_.deadline();
     timeout = sleepsUntil_ - now;
   }
@@ -170,9 +162,7 @@ std::optional<std::chrono::nanoseconds> ServerQueue::prepareToSleep() {
 
 bool ServerQueue::prepareToWait() {
   const platform::MutexLock lock(mutex_);
-  if (std::exchange(lookAround_, false)) {
-    return false;
-  }
+  if (std::exchange(woken_, false)) return false;
   sleepsUntil_ = {};  // what is delayed stays so
   sleeping_ = true;
   return true;

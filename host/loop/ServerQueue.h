@@ -89,7 +89,7 @@ class ServerQueue final : public platform::WorkQueue {
   std::vector<platform::Work> incoming_ TARN_GUARDED_BY(mutex_);
   DelayedWork<platform::Work> delayed_ TARN_GUARDED_BY(mutex_);
   bool sleeping_ TARN_GUARDED_BY(mutex_) = false;
-  bool lookAround_ TARN_GUARDED_BY(mutex_) = false;  // wake() was called and no turn has begun since
+  bool woken_ TARN_GUARDED_BY(mutex_) = false;  // wake() was called and no turn has begun since
   std::chrono::nanoseconds sleepsUntil_ TARN_GUARDED_BY(mutex_){};
 };
 

@@ -18,9 +18,7 @@ void ServiceManager::notifyWatchdog() {
 
 std::optional<std::chrono::microseconds> ServiceManager::watchdogInterval() const {
   std::uint64_t microseconds = 0;
-  if (sd_watchdog_enabled(0, &microseconds) <= 0) {
-    return std::nullopt;
-  }
+  if (sd_watchdog_enabled(0, &microseconds) <= 0) return std::nullopt;
   return std::chrono::microseconds(microseconds);
 }
 

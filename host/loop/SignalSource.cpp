@@ -6,7 +6,7 @@
 #include <cerrno>
 #include <csignal>
 
-#include "host/log/HostLog.h"
+#include "host/system/SystemError.h"
 
 namespace tarn::linux_host {
 
@@ -28,14 +28,13 @@ SignalSource::SignalSource() {
   std::signal(SIGPIPE, SIG_IGN);
 }
 
-std::string SignalSource::start(const std::shared_ptr<SignalSource>& source, MainLoop& loop, Handler handler) {
+Status SignalSource::start(const std::shared_ptr<SignalSource>& source, MainLoop& loop, Handler handler) {
   const sigset_t signals = endingSignals();
   source->handler_ = std::move(handler);
   source->descriptor_ = UniqueDescriptor(::signalfd(-1, &signals, SFD_CLOEXEC | SFD_NONBLOCK));
-  if (!source->descriptor_ || !loop.watch(source->descriptor_.get(), EPOLLIN, source)) {
-    return "can't receive signals" + errorSuffix(errno);
-  }
-  return {};
+  const Status watched =
+      source->descriptor_ ? loop.watch(source->descriptor_.get(), EPOLLIN, source) : lastSystemError();
+  return watched.ok() ? Status() : errorOf("can't receive signals", *watched);
 }
 
 void SignalSource::handleEvents(std::uint32_t) {

@@ -4,10 +4,10 @@
 #pragma once
 
 #include <memory>
-#include <string>
 
 #include "host/loop/MainLoop.h"
 #include "platform/UniqueFunction.h"
+#include "plist/Result.h"
 
 namespace tarn::linux_host {
 
@@ -20,8 +20,8 @@ class SignalSource final : public EventHandler {
   SignalSource(const SignalSource&) = delete;
   SignalSource& operator=(const SignalSource&) = delete;
 
-  // Calls `handler` for every signal from now on, those that came before included. What went wrong, or nothing.
-  static std::string start(const std::shared_ptr<SignalSource>& source, MainLoop& loop, Handler handler);
+  // Calls `handler` for every signal from now on, those that came before included.
+  [[nodiscard]] static Status start(const std::shared_ptr<SignalSource>& source, MainLoop& loop, Handler handler);
 
   void handleEvents(std::uint32_t events) override;
 

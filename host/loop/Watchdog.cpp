@@ -4,9 +4,7 @@ namespace tarn::linux_host {
 
 bool queueIsAlive(const QueueProgress::Sample& before, const QueueProgress::Sample& now,
                   std::chrono::nanoseconds monotonicNow) noexcept {
-  if (now.steps != before.steps || now.idle) {
-    return true;
-  }
+  if (now.steps != before.steps || now.idle) return true;
   return now.waitingSince && monotonicNow - *now.waitingSince < kLongestDeliberateWait;
 }
 
@@ -15,9 +13,7 @@ Watchdog::Watchdog(const platform::Clock& clock, const QueueProgress& progress, 
 
 void Watchdog::start() {
   const auto interval = manager_.watchdogInterval();
-  if (!interval || thread_.joinable()) {
-    return;
-  }
+  if (!interval || thread_.joinable()) return;
   thread_ = std::thread([this, period = *interval / 2] { serve(period); });
 }
 

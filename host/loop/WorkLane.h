@@ -45,9 +45,7 @@ class WorkLane {
   void addNext(platform::Work rest) { rest_ = std::move(rest); }
   // The next piece; only when there is one.
   platform::Work take() {
-    if (rest_) {
-      return std::move(rest_);
-    }
+    if (rest_) return std::move(rest_);
     platform::Work work = std::move(pieces_[next_++]);
     if (next_ == pieces_.size()) {
       pieces_.clear();

@@ -39,9 +39,7 @@ void runOne(WorkerPool::Line& line, platform::Work work) {
 
 void WorkerPool::start(std::size_t threads) {
   const platform::MutexLock lock(mutex_);
-  if (!threads_.empty() || stopping_) {
-    return;
-  }
+  if (!threads_.empty() || stopping_) return;
   try {
     for (std::size_t i = 0; i < threads; ++i) {
       threads_.emplace_back([this] { serve(); });
@@ -88,9 +86,7 @@ void WorkerPool::destroyWhatIsLeft() {
 
 void WorkerPool::add(const std::shared_ptr<Line>& line, platform::Work work, Urgency urgency) {
   const platform::MutexLock lock(mutex_);
-  if (over_) {
-    return;
-  }
+  if (over_) return;
   enqueue(line, std::move(work));
   if (urgency == Urgency::AtOnce && looking_) {
     ended_.notifyOne();
@@ -99,9 +95,7 @@ void WorkerPool::add(const std::shared_ptr<Line>& line, platform::Work work, Urg
 
 void WorkerPool::addAfter(const std::shared_ptr<Line>& line, nanoseconds delay, platform::Work work) {
   const platform::MutexLock lock(mutex_);
-  if (over_) {
-    return;
-  }
+  if (over_) return;
   if (delay <= nanoseconds::zero()) {
     enqueue(line, std::move(work));
     return;
@@ -128,9 +122,7 @@ void WorkerPool::resume(const std::shared_ptr<Line>& line) {
 }
 
 void WorkerPool::help(const std::shared_ptr<Line>& line, nanoseconds longest) {
-  if (CurrentQueue::is(line.get())) {
-    return;
-  }
+  if (CurrentQueue::is(line.get())) return;
   const platform::MutexLock lock(mutex_);
   ++helpers_;
   turnEnded_.waitFor(mutex_, longest, [&line] { return !line->running; });
@@ -148,7 +140,9 @@ void WorkerPool::afterWhatIsUnfinished(platform::Work done) {
     std::atomic<std::size_t> left;
     platform::Work done;
     void pass() {
-      if (left.fetch_sub(1) == 1) done();
+      if (left.fetch_sub(1) == 1) {
+        done();
+      }
     }
   };
   const auto barrier = std::make_shared<Barrier>();
@@ -214,9 +208,7 @@ void WorkerPool::endSuspension(Suspensions::iterator suspension) {
 }
 
 void WorkerPool::takeDue() {
-  if (delayed_.empty() && suspensions_.empty()) {
-    return;
-  }
+  if (delayed_.empty() && suspensions_.empty()) return;
   const auto now = clock_.monotonic();
   while (delayed_.due(now)) {
     auto [line, work] = delayed_.take();

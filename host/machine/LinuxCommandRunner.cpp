@@ -68,7 +68,9 @@ class RunningShell final : public platform::RunningCommand {
       kill();
       reap(0);
     }
-    if (timedOut_) end_ = {CommandEnd::Kind::TimedOut, 0};
+    if (timedOut_) {
+      end_ = {CommandEnd::Kind::TimedOut, 0};
+    }
     return end_;
   }
 
@@ -92,7 +94,9 @@ class RunningShell final : public platform::RunningCommand {
           unread_.append(block.data(), static_cast<std::size_t>(got));
           return true;
         }
-        if (got == 0 || errno != EINTR) output_.reset();
+        if (got == 0 || errno != EINTR) {
+          output_.reset();
+        }
       } else if (ready == 0 && wait == 0) {
         timedOut_ = true;
         output_.reset();
@@ -154,9 +158,10 @@ class SpawnPlan {
   SpawnPlan(const SpawnPlan&) = delete;
   SpawnPlan& operator=(const SpawnPlan&) = delete;
 
-  // 0, or the error number.
-  int spawn(pid_t& process, const char* path, char* const arguments[]) const {
-    return ::posix_spawn(&process, path, &actions_, &attributes_, arguments, environ);
+  Result<pid_t> spawn(const char* path, char* const arguments[]) const {
+    pid_t process = 0;
+    const int error = ::posix_spawn(&process, path, &actions_, &attributes_, arguments, environ);
+    return {process, error == 0 ? Status() : systemError(error)};
   }
 
  private:
@@ -166,8 +171,8 @@ class SpawnPlan {
 
 }  // namespace
 
-platform::Outcome<std::unique_ptr<platform::RunningCommand>> LinuxCommandRunner::start(
-    std::string_view commandText, std::chrono::nanoseconds timeLimit) {
+Result<std::unique_ptr<platform::RunningCommand>> LinuxCommandRunner::start(std::string_view commandText,
+                                                                            std::chrono::nanoseconds timeLimit) {
   const auto deadline = SteadyClock::now() + timeLimit;
   std::array<int, 2> ends{};
   if (::pipe2(ends.data(), O_CLOEXEC) != 0) return {nullptr, lastSystemError()};
@@ -178,11 +183,9 @@ platform::Outcome<std::unique_ptr<platform::RunningCommand>> LinuxCommandRunner:
   std::string option = "-c";
   std::string command(commandText);
   const std::array<char*, 4> arguments{shell.data(), option.data(), command.data(), nullptr};
-  pid_t process = 0;
-  if (const int error = SpawnPlan(writeEnd.get()).spawn(process, "/bin/sh", arguments.data()); error != 0) {
-    return {nullptr, systemError(error)};
-  }
-  return {std::make_unique<RunningShell>(process, std::move(readEnd), deadline), {}};
+  Result<pid_t> process = SpawnPlan(writeEnd.get()).spawn("/bin/sh", arguments.data());
+  if (process.failed()) return {nullptr, std::move(process.error)};
+  return {std::make_unique<RunningShell>(process.value, std::move(readEnd), deadline), {}};
 }
 
 }  // namespace tarn::linux_host

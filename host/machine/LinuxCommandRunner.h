@@ -10,8 +10,8 @@ namespace tarn::linux_host {
 
 class LinuxCommandRunner final : public platform::CommandRunner {
  public:
-  platform::Outcome<std::unique_ptr<platform::RunningCommand>> start(std::string_view commandText,
-                                                                     std::chrono::nanoseconds timeLimit) override;
+  Result<std::unique_ptr<platform::RunningCommand>> start(std::string_view commandText,
+                                                          std::chrono::nanoseconds timeLimit) override;
 };
 
 }  // namespace tarn::linux_host

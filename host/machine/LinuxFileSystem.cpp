@@ -16,9 +16,6 @@
 
 namespace tarn::linux_host {
 
-using platform::MaybeError;
-using platform::Outcome;
-
 namespace {
 
 constexpr std::size_t kBlockBytes = std::size_t{64} * 1024;
@@ -32,21 +29,21 @@ class OpenFile final : public platform::WritableFile {
   OpenFile(const OpenFile&) = delete;
   OpenFile& operator=(const OpenFile&) = delete;
 
-  MaybeError write(std::string_view bytes) override {
+  Status write(std::string_view bytes) override {
     return descriptor_ < 0 ? systemError(EBADF) : writeAll(descriptor_, bytes);
   }
 
-  MaybeError close() override {
+  Status close() override {
     if (descriptor_ < 0) return systemError(EBADF);
     // A disk that is written to later reports its failure here.
-    return ::close(std::exchange(descriptor_, -1)) == 0 ? MaybeError() : lastSystemError();
+    return ::close(std::exchange(descriptor_, -1)) == 0 ? Status() : lastSystemError();
   }
 
  private:
   int descriptor_;  // -1 once closed
 };
 
-MaybeError copyContent(int from, FileReplacement& to) {
+Status copyContent(int from, FileReplacement& to) {
   std::string block(kBlockBytes, '\0');
   for (;;) {
     const ssize_t got = ::read(from, block.data(), block.size());
@@ -56,12 +53,12 @@ MaybeError copyContent(int from, FileReplacement& to) {
       return lastSystemError();
     }
     to.write(std::string_view(block).substr(0, static_cast<std::size_t>(got)));
-    if (to.failure()) return to.failure();
+    if (to.failure().failed()) return to.failure();
   }
 }
 
 // For another file system, where a file can't just be renamed: a copy beside the target takes its place when whole.
-MaybeError moveByCopy(const std::string& from, const std::string& to) {
+Status moveByCopy(const std::string& from, const std::string& to) {
   const UniqueDescriptor source(::open(from.c_str(), O_RDONLY | O_CLOEXEC));
   if (!source) return lastSystemError();
   std::string beside = to + ".XXXXXX";
@@ -69,13 +66,13 @@ MaybeError moveByCopy(const std::string& from, const std::string& to) {
   if (!made) return lastSystemError();
   FileReplacement copy;
   copy.begin(std::move(made), std::move(beside));
-  if (auto error = copyContent(source.get(), copy)) return error;
+  if (auto error = copyContent(source.get(), copy); error.failed()) return error;
   struct stat status {};
   if (::fstat(source.get(), &status) != 0 || ::fchmod(copy.descriptor(), status.st_mode & 0777U) != 0) {
     return lastSystemError();
   }
-  if (auto error = copy.takePlace(to)) return error;
-  return ::unlink(from.c_str()) == 0 ? MaybeError() : lastSystemError();
+  if (auto error = copy.takePlace(to); error.failed()) return error;
+  return ::unlink(from.c_str()) == 0 ? Status() : lastSystemError();
 }
 
 }  // namespace
@@ -86,25 +83,27 @@ std::string LinuxFileSystem::wellKnownDirectory(platform::WellKnownDirectory whi
   return which == platform::WellKnownDirectory::DiagnosticLogs ? directories_.diagnosticLogs : directories_.temporary;
 }
 
-MaybeError LinuxFileSystem::createDirectories(std::string_view path, std::uint32_t permissions) {
+Status LinuxFileSystem::createDirectories(std::string_view path, std::uint32_t permissions) {
   return linux_host::createDirectories(std::string(path), static_cast<mode_t>(permissions));
 }
 
-MaybeError LinuxFileSystem::createFile(std::string_view path) {
+Status LinuxFileSystem::createFile(std::string_view path) {
   const UniqueDescriptor file(
       ::open(std::string(path).c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, kFilePermissions));
-  return file ? MaybeError() : lastSystemError();
+  return file ? Status() : lastSystemError();
 }
 
-Outcome<std::unique_ptr<platform::WritableFile>> LinuxFileSystem::openForWriting(std::string_view path) {
+Result<std::unique_ptr<platform::WritableFile>> LinuxFileSystem::openForWriting(std::string_view path) {
   const int file = ::open(std::string(path).c_str(), O_WRONLY | O_TRUNC | O_CLOEXEC);
   if (file < 0) return {nullptr, lastSystemError()};
   return {std::make_unique<OpenFile>(file), {}};
 }
 
-Outcome<std::string> LinuxFileSystem::readFile(std::string_view path, std::size_t mostBytes) {
+Result<std::string> LinuxFileSystem::readFile(std::string_view path, std::size_t mostBytes) {
   auto file = readSmallFile(std::string(path), mostBytes);
-  if (file.failed()) file.value.clear();
+  if (file.failed()) {
+    file.value.clear();
+  }
   return file;
 }
 
@@ -112,7 +111,7 @@ bool LinuxFileSystem::exists(std::string_view path) const {
   return ::access(std::string(path).c_str(), F_OK) == 0;
 }
 
-MaybeError LinuxFileSystem::moveFile(std::string_view from, std::string_view to) {
+Status LinuxFileSystem::moveFile(std::string_view from, std::string_view to) {
   const std::string source(from);
   const std::string target(to);
   if (::rename(source.c_str(), target.c_str()) == 0) return {};

@@ -17,12 +17,12 @@ class LinuxFileSystem final : public platform::FileSystem {
   explicit LinuxFileSystem(Directories directories);
 
   std::string wellKnownDirectory(platform::WellKnownDirectory which) const override;
-  platform::MaybeError createDirectories(std::string_view path, std::uint32_t permissions) override;
-  platform::MaybeError createFile(std::string_view path) override;
-  platform::Outcome<std::unique_ptr<platform::WritableFile>> openForWriting(std::string_view path) override;
-  platform::Outcome<std::string> readFile(std::string_view path, std::size_t mostBytes) override;
+  Status createDirectories(std::string_view path, std::uint32_t permissions) override;
+  Status createFile(std::string_view path) override;
+  Result<std::unique_ptr<platform::WritableFile>> openForWriting(std::string_view path) override;
+  Result<std::string> readFile(std::string_view path, std::size_t mostBytes) override;
   bool exists(std::string_view path) const override;
-  platform::MaybeError moveFile(std::string_view from, std::string_view to) override;
+  Status moveFile(std::string_view from, std::string_view to) override;
 
  private:
   const Directories directories_;

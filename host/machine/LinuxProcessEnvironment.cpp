@@ -7,7 +7,7 @@
 
 namespace tarn::linux_host {
 
-platform::MaybeError LinuxProcessEnvironment::set(std::string_view name, std::string_view value) {
+Status LinuxProcessEnvironment::set(std::string_view name, std::string_view value) {
   if (::setenv(std::string(name).c_str(), std::string(value).c_str(), 1) == 0) return {};
   return lastSystemError();
 }

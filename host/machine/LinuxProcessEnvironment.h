@@ -7,7 +7,7 @@ namespace tarn::linux_host {
 
 class LinuxProcessEnvironment final : public platform::ProcessEnvironment {
  public:
-  platform::MaybeError set(std::string_view name, std::string_view value) override;
+  Status set(std::string_view name, std::string_view value) override;
 };
 
 }  // namespace tarn::linux_host

@@ -12,8 +12,8 @@
 #include <utility>
 #include <vector>
 
-#include "host/log/HostLog.h"
 #include "host/system/SmallFile.h"
+#include "host/system/SystemError.h"
 #include "wire/Utf8.h"
 
 namespace tarn::linux_host {
@@ -29,9 +29,7 @@ constexpr int kMaximumTripPoints = 64;
 // A kernel file's one line, nothing when it can't be read.
 std::optional<std::string> readLine(const std::string& path) {
   auto [line, error] = readSmallFile(path, kMaximumFactBytes);
-  if (error) {
-    return std::nullopt;
-  }
+  if (error.failed()) return std::nullopt;
   line.resize(std::min(line.find('\n'), line.size()));
   return std::move(line);
 }
@@ -59,9 +57,7 @@ std::string_view baseName(std::string_view path) {
 std::string executableName(const std::string& processFolder) {
   std::array<char, 4096> target{};
   const ssize_t length = ::readlink((processFolder + "/exe").c_str(), target.data(), target.size());
-  if (length <= 0) {
-    return {};
-  }
+  if (length <= 0) return {};
   std::string_view path(target.data(), static_cast<std::size_t>(length));
   constexpr std::string_view kDeleted = " (deleted)";  // the kernel's mark for a program that was replaced on disk
   if (path.ends_with(kDeleted)) {
@@ -79,15 +75,11 @@ std::string firstArgumentName(const std::string& processFolder) {
 std::optional<std::uint64_t> statusBytes(std::string_view status, std::string_view name) {
   const std::string line = "\n" + std::string(name) + ":";
   const std::size_t at = status.find(line);
-  if (at == std::string_view::npos) {
-    return std::nullopt;
-  }
+  if (at == std::string_view::npos) return std::nullopt;
   const std::string_view rest =
       status.substr(std::min(status.find_first_not_of(" \t", at + line.size()), status.size()));
   std::uint64_t kilobytes = 0;
-  if (std::from_chars(rest.data(), rest.data() + rest.size(), kilobytes).ec != std::errc()) {
-    return std::nullopt;
-  }
+  if (std::from_chars(rest.data(), rest.data() + rest.size(), kilobytes).ec != std::errc()) return std::nullopt;
   return kilobytes * 1024;
 }
 
@@ -97,9 +89,7 @@ std::vector<std::string> namesIn(const std::string& folder, std::string_view pre
   std::vector<std::string> names;
   while (directory) {
     const dirent* entry = ::readdir(directory.get());
-    if (entry == nullptr) {
-      break;
-    }
+    if (entry == nullptr) break;
     if (std::string_view(entry->d_name).starts_with(prefix)) {
       names.emplace_back(entry->d_name);
     }
@@ -109,27 +99,19 @@ std::vector<std::string> namesIn(const std::string& folder, std::string_view pre
 
 // What it means to be at or above a trip point of this type.
 ThermalState stateAtTrip(std::string_view type) {
-  if (type == "critical") {
-    return ThermalState::Critical;
-  }
-  if (type == "hot") {
-    return ThermalState::Serious;
-  }
+  if (type == "critical") return ThermalState::Critical;
+  if (type == "hot") return ThermalState::Serious;
   return type == "passive" ? ThermalState::Fair : ThermalState::Nominal;
 }
 
 ThermalState zoneState(const std::string& zone) {
   const std::optional<std::int64_t> temperature = readNumber(zone + "/temp");
-  if (!temperature || readLine(zone + "/mode") == "disabled") {
-    return ThermalState::Nominal;
-  }
+  if (!temperature || readLine(zone + "/mode") == "disabled") return ThermalState::Nominal;
   ThermalState worst = ThermalState::Nominal;
   for (int trip = 0; trip < kMaximumTripPoints; ++trip) {
     const std::string stem = zone + "/trip_point_" + std::to_string(trip);
     const std::optional<std::string> type = readLine(stem + "_type");
-    if (!type) {
-      break;
-    }
+    if (!type) break;
     const std::optional<std::int64_t> limit = readNumber(stem + "_temp");
     if (limit && *limit > 0 && *temperature >= *limit) {  // zero and below: firmware's word for "not set"
       worst = std::max(worst, stateAtTrip(*type));
@@ -153,35 +135,25 @@ std::optional<std::string> LinuxProcessFacts::processName(std::int32_t processId
   }
   const std::string folder = procRoot_ + "/" + std::to_string(processIdentifier);
   auto [name, error] = readSmallFile(folder + "/comm", kMaximumFactBytes);
-  if (error) {
-    return std::nullopt;
-  }
+  if (error.failed()) return std::nullopt;
   // It may itself hold line ends; the kernel adds one after it.
   if (name.ends_with('\n')) {
     name.pop_back();
   }
-  if (name.size() < kKernelNameBytes) {
-    return asText(name);
-  }
+  if (name.size() < kKernelNameBytes) return asText(name);
   for (const std::string& whole : {executableName(folder), firstArgumentName(folder)}) {
-    if (whole.starts_with(name)) {
-      return asText(whole);
-    }
+    if (whole.starts_with(name)) return asText(whole);
   }
   return asText(name);
 }
 
-platform::ProcessFacts::Footprint LinuxProcessFacts::physicalFootprint() const {
+Result<std::uint64_t> LinuxProcessFacts::physicalFootprint() const {
   const std::string path = procRoot_ + "/self/status";
   const auto [status, error] = readSmallFile(path, kMaximumFactBytes);
-  if (error) {
-    return {std::nullopt, path + errorSuffix(*error)};
-  }
+  if (error.failed()) return {0, errorOf(path, *error)};
   const std::optional<std::uint64_t> anonymous = statusBytes(status, "RssAnon");
   const std::optional<std::uint64_t> swapped = statusBytes(status, "VmSwap");
-  if (!anonymous || !swapped) {
-    return {std::nullopt, path + ": no " + (anonymous ? "VmSwap" : "RssAnon")};
-  }
+  if (!anonymous || !swapped) return {0, Error{0, path + ": no " + (anonymous ? "VmSwap" : "RssAnon")}};
   return {*anonymous + *swapped, {}};
 }
 

@@ -24,7 +24,7 @@ class LinuxProcessFacts final : public platform::ProcessFacts {
   // argument's, completes one that may have been cut.
   std::optional<std::string> processName(std::int32_t processIdentifier) const override;
   // Anonymous resident memory and swapped memory: what would be free if this process weren't there.
-  Footprint physicalFootprint() const override;
+  Result<std::uint64_t> physicalFootprint() const override;
   platform::ThermalState thermalState() const override;
   bool lowPowerModeEnabled() const override;
   platform::LoadAverages loadAverages() const override;

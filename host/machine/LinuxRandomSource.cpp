@@ -13,7 +13,9 @@ namespace {
 std::uint64_t randomWord() {
   std::uint64_t word = 0;
   while (::getrandom(&word, sizeof word, 0) != static_cast<ssize_t>(sizeof word)) {
-    if (errno != EINTR) std::abort();  // a kernel that has no random numbers: nothing that we could do about it
+    if (errno != EINTR) {
+      std::abort();
+    }  // a kernel that has no random numbers: nothing that we could do about it
   }
   return word;
 }

@@ -11,7 +11,8 @@
 #include <utility>
 
 #include "host/log/HostLog.h"
-#include "host/settings/StateFolder.h"
+#include "host/settings/PlainName.h"
+#include "host/system/SystemError.h"
 #include "platform/WorkQueue.h"
 
 namespace tarn::linux_host {
@@ -30,14 +31,10 @@ FileNotificationCenter::FileNotificationCenter(std::string folder, MainLoop& loo
 
 platform::NotificationCenter::Registration FileNotificationCenter::registerFor(
     std::string_view name, std::shared_ptr<platform::WorkQueue> queue, Handler handler) {
-  if (!isPlainName(name)) {
-    return {EINVAL, -1};
-  }
-  if (entries_.size() == kMaximumRegistrations) {
-    return {ENOSPC, -1};
-  }
-  if (const int error = watched_ ? 0 : startWatching(); error != 0) {
-    return {error, -1};
+  if (!isPlainName(name)) return {EINVAL, -1};
+  if (entries_.size() == kMaximumRegistrations) return {ENOSPC, -1};
+  if (const Status watching = watched_ ? Status() : startWatching(); watching.failed()) {
+    return {static_cast<std::int32_t>(watching->code), -1};
   }
   const std::int32_t token = ++lastToken_;
   entries_.emplace(token,
@@ -59,42 +56,34 @@ void FileNotificationCenter::cancel(std::int32_t token) {
 }
 
 bool FileNotificationCenter::post(std::string_view name, std::optional<std::uint64_t> state) {
-  const std::string fault = folder_.post(name, state);
-  if (!fault.empty()) {
-    hostLog(log_, kHostCategory, platform::LogLevel::Error, kModule, "notification not posted: " + fault);
+  const Status posted = folder_.post(name, state);
+  if (posted.failed()) {
+    hostLog(log_, kHostCategory, platform::LogLevel::Error, kModule, "notification not posted: " + posted->text);
   }
-  return fault.empty();
+  return posted.ok();
 }
 
-// 0 or an errno value.
-int FileNotificationCenter::startWatching() {
+Status FileNotificationCenter::startWatching() {
   events_ = UniqueDescriptor(::inotify_init1(IN_CLOEXEC | IN_NONBLOCK));
-  if (!events_) {
-    return errno;
-  }
-  if (const int error = watchFolder(); error != 0) {
-    return error;
-  }
-  watched_ = loop_.watch(events_.get(), EPOLLIN, shared_from_this());
-  return watched_ ? 0 : errno;
+  if (!events_) return lastSystemError();
+  if (Status watching = watchFolder(); watching.failed()) return watching;
+  Status watching = loop_.watch(events_.get(), EPOLLIN, shared_from_this());
+  watched_ = watching.ok();
+  return watching;
 }
 
-int FileNotificationCenter::watchFolder() {
-  if (const int error = folder_.make(); error != 0) {
-    return error;
-  }
+Status FileNotificationCenter::watchFolder() {
+  if (Status made = folder_.make(); made.failed()) return made;
   watch_ = ::inotify_add_watch(events_.get(), folder_.path().c_str(),
                                kPosts | IN_DELETE_SELF | IN_MOVE_SELF | IN_ONLYDIR | IN_EXCL_UNLINK);
-  return watch_ < 0 ? errno : 0;
+  return watch_ < 0 ? lastSystemError() : Status();
 }
 
 // One gulp of changes; the loop calls again while there are more.
 void FileNotificationCenter::handleEvents(std::uint32_t) {
   alignas(inotify_event) std::array<char, 16384> buffer;
   const ssize_t length = ::read(events_.get(), buffer.data(), buffer.size());
-  if (length <= 0) {
-    return;
-  }
+  if (length <= 0) return;
   const auto end = static_cast<std::size_t>(length);
   for (std::size_t at = 0; at + sizeof(inotify_event) <= end;) {
     inotify_event event{};
@@ -122,7 +111,7 @@ void FileNotificationCenter::handleEvent(int watch, std::uint32_t mask, std::str
 
 // Watches the folder again, now or as soon as that is possible. Posts may have been missed since it went away.
 void FileNotificationCenter::renewWatch() {
-  if (watchFolder() == 0) {
+  if (watchFolder().ok()) {
     deliverAll();
     return;
   }
@@ -148,9 +137,7 @@ void FileNotificationCenter::deliverAll() {
 }
 
 void FileNotificationCenter::handOver(const std::shared_ptr<Entry>& entry) {
-  if (std::exchange(entry->waiting, true)) {
-    return;
-  }
+  if (std::exchange(entry->waiting, true)) return;
   entry->queue->async([entry] {
     entry->waiting = false;
     if (!entry->cancelled) {

@@ -24,6 +24,7 @@
 #include "host/system/UniqueDescriptor.h"
 #include "platform/Log.h"
 #include "platform/NotificationCenter.h"
+#include "plist/Result.h"
 
 namespace tarn::linux_host {
 
@@ -60,8 +61,8 @@ class FileNotificationCenter final : public platform::NotificationCenter,
     bool cancelled = false;
   };
 
-  int startWatching();
-  int watchFolder();
+  Status startWatching();
+  Status watchFolder();
   void handleEvent(int watch, std::uint32_t mask, std::string_view name);
   void renewWatch();
   void deliver(std::string_view name);

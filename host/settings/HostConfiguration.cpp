@@ -16,8 +16,8 @@
 #pragma pop_macro("TOML_UNREACHABLE")
 #include <toml++/toml.h>
 
-#include "host/log/HostLog.h"
 #include "host/system/SmallFile.h"
+#include "host/system/SystemError.h"
 #include "plist/EscapedText.h"
 
 namespace tarn::linux_host {
@@ -26,45 +26,43 @@ namespace {
 
 constexpr std::size_t kMaximumFileBytes = std::size_t{1} << 20U;
 
-// What is wrong with a setting, to stand behind its name; empty when nothing is.
-using Complaint = std::string;
+// What is wrong with a setting, to stand after its name.
+Error wrong(std::string text) {
+  return {0, std::move(text)};
+}
 
-Complaint take(const toml::node& node, bool& setting) {
+Status take(const toml::node& node, bool& setting) {
   const auto value = node.value_exact<bool>();
   setting = value.value_or(setting);
-  return value ? "" : "must be true or false";
+  return value ? Status() : wrong("must be true or false");
 }
 
-Complaint take(const toml::node& node, std::string& setting) {
+Status take(const toml::node& node, std::string& setting) {
   const auto value = node.value_exact<std::string>();
   setting = value.value_or(setting);
-  return value ? "" : "must be a text";
+  return value ? Status() : wrong("must be a text");
 }
 
-Complaint take(const toml::node& node, std::optional<platform::SnareReason>& reason) {
+Status take(const toml::node& node, std::optional<platform::SnareReason>& reason) {
   constexpr auto& kNames = platform::kSnareReasonNames;
   std::string name;
-  if (Complaint complaint = take(node, name); !complaint.empty()) {
-    return complaint;
-  }
+  if (Status taken = take(node, name); taken.failed()) return taken;
   const auto* const found = std::find(kNames.begin(), kNames.end(), name);
-  if (found == kNames.end()) {
-    return name.empty() ? "" : "must be the name of a reason code, or empty";
-  }
+  if (found == kNames.end()) return name.empty() ? Status() : wrong("must be the name of a reason code, or empty");
   reason = static_cast<platform::SnareReason>(found - kNames.begin());
-  return "";
+  return {};
 }
 
-Complaint takePath(const toml::node& node, const char* what, std::optional<std::string>& path) {
+Status takePath(const toml::node& node, const char* what, std::optional<std::string>& path) {
   path = node.value_exact<std::string>();
-  return path && !path->empty() ? Complaint() : Complaint("must be ") + what + "'s path";
+  return path && !path->empty() ? Status() : wrong(std::string("must be ") + what + "'s path");
 }
 
-Complaint take(const toml::node& node, std::optional<std::string>& folder) {
+Status take(const toml::node& node, std::optional<std::string>& folder) {
   return takePath(node, "a folder", folder);
 }
 
-Complaint take(const toml::node& node, std::vector<std::string>& setting) {
+Status take(const toml::node& node, std::vector<std::string>& setting) {
   const toml::array* items = node.as_array();
   std::vector<std::string> texts;
   if (items != nullptr) {
@@ -74,50 +72,48 @@ Complaint take(const toml::node& node, std::vector<std::string>& setting) {
       }
     }
   }
-  if (items == nullptr || texts.size() != items->size()) {
-    return "must be a list of texts";
-  }
+  if (items == nullptr || texts.size() != items->size()) return wrong("must be a list of texts");
   setting = std::move(texts);
-  return "";
+  return {};
 }
 
-Complaint takeWhole(const toml::node& node, std::int64_t lowest, std::int64_t highest, std::int64_t& number) {
+Status takeWhole(const toml::node& node, std::int64_t lowest, std::int64_t highest, std::int64_t& number) {
   const auto value = node.value_exact<std::int64_t>();
   if (!value || *value < lowest || *value > highest) {
-    return "must be a whole number from " + std::to_string(lowest) + " to " + std::to_string(highest);
+    return wrong("must be a whole number from " + std::to_string(lowest) + " to " + std::to_string(highest));
   }
   number = *value;
-  return "";
+  return {};
 }
 
 template <std::int64_t kLowest, std::int64_t kHighest, class Number>
-Complaint takeWithin(const toml::node& node, Number& setting) {
+Status takeWithin(const toml::node& node, Number& setting) {
   std::int64_t number = static_cast<std::int64_t>(setting);
-  Complaint complaint = takeWhole(node, kLowest, kHighest, number);
+  Status taken = takeWhole(node, kLowest, kHighest, number);
   setting = static_cast<Number>(number);
-  return complaint;
+  return taken;
 }
 
 template <std::int64_t kLowest, std::int64_t kHighest>
-Complaint takeMilliseconds(const toml::node& node, std::chrono::milliseconds& setting) {
+Status takeMilliseconds(const toml::node& node, std::chrono::milliseconds& setting) {
   std::int64_t number = setting.count();
-  Complaint complaint = takeWhole(node, kLowest, kHighest, number);
+  Status taken = takeWhole(node, kLowest, kHighest, number);
   setting = std::chrono::milliseconds(number);
-  return complaint;
+  return taken;
 }
 
-Complaint takeDelay(const toml::node& node, std::chrono::milliseconds& setting) {
+Status takeDelay(const toml::node& node, std::chrono::milliseconds& setting) {
   return takeMilliseconds<0, 3'600'000>(node, setting);
 }
 
-Complaint takeRate(const toml::node& node, std::size_t& setting) {
+Status takeRate(const toml::node& node, std::size_t& setting) {
   return takeWithin<0, 1'000'000'000>(node, setting);
 }
 
 struct Setting {
   std::string_view section;
   std::string_view key;
-  Complaint (*apply)(const toml::node& node, HostConfiguration& configuration);
+  Status (*apply)(const toml::node& node, HostConfiguration& configuration);
 };
 
 using Node = const toml::node&;
@@ -160,18 +156,14 @@ constexpr std::array<Setting, 21> kSettings{{
 
 bool isSection(std::string_view name) {
   for (const Setting& setting : kSettings) {
-    if (setting.section == name) {
-      return true;
-    }
+    if (setting.section == name) return true;
   }
   return false;
 }
 
 const Setting* findSetting(std::string_view section, std::string_view key) {
   for (const Setting& setting : kSettings) {
-    if (setting.section == section && setting.key == key) {
-      return &setting;
-    }
+    if (setting.section == section && setting.key == key) return &setting;
   }
   return nullptr;
 }
@@ -212,9 +204,8 @@ class Reader {
         complain(key.source(), "unknown key \"", name, "\"");
         continue;
       }
-      const Complaint complaint = setting->apply(node, configuration);
-      if (!complaint.empty()) {
-        complain(key.source(), "\"", name, "\" " + complaint);
+      if (const Status taken = setting->apply(node, configuration); taken.failed()) {
+        complain(key.source(), "\"", name, "\" " + taken->text);
       }
     }
   }
@@ -231,7 +222,7 @@ class Reader {
 
 }  // namespace
 
-ReadConfiguration parseConfiguration(std::string_view text, std::string_view name) {
+Result<HostConfiguration> parseConfiguration(std::string_view text, std::string_view name) {
   const toml::parse_result parsed = toml::parse(text);
   Fault fault;
   HostConfiguration configuration;
@@ -243,19 +234,15 @@ ReadConfiguration parseConfiguration(std::string_view text, std::string_view nam
   } else {
     fault = {parsed.error().source().begin.line, std::string(parsed.error().description())};
   }
-  if (fault.text.empty()) {
-    return {std::move(configuration), {}};
-  }
+  if (fault.text.empty()) return {std::move(configuration), {}};
   std::string error = std::string(name) + ":" + std::to_string(fault.line) + ": ";
   plist::appendEscapedControls(error, fault.text);  // keys may hold line ends, an error is one line
-  return {std::nullopt, std::move(error)};
+  return {{}, Error{0, std::move(error)}};
 }
 
-ReadConfiguration readConfiguration(const std::string& path) {
+Result<HostConfiguration> readConfiguration(const std::string& path) {
   const auto file = readSmallFile(path, kMaximumFileBytes);
-  if (file.failed()) {
-    return {std::nullopt, path + errorSuffix(*file.error)};
-  }
+  if (file.failed()) return {{}, errorOf(path, *file.error)};
   return parseConfiguration(file.value, path);
 }
 

@@ -10,6 +10,7 @@
 
 #include "host/socket/HostLimits.h"
 #include "platform/SnareService.h"
+#include "plist/Result.h"
 #include "recorder/RecorderOptions.h"
 #include "recorder/RecorderRtcReportingService.h"
 
@@ -42,14 +43,10 @@ struct HostConfiguration {
   bool operator==(const HostConfiguration&) const = default;
 };
 
-struct ReadConfiguration {
-  std::optional<HostConfiguration> configuration;
-  std::string error;  // when there is none: "NAME:LINE: what is wrong", or "NAME: why it can't be read"
-};
-
-// Reads the file; at most 1 MiB.
-ReadConfiguration readConfiguration(const std::string& path);
+// Reads the file; at most 1 MiB. An error reads "NAME:LINE: what is wrong", or "NAME: why it can't be read"; then the
+// defaults stand beside it.
+Result<HostConfiguration> readConfiguration(const std::string& path);
 // The same of a text that is in memory; `name` stands for the file in errors.
-ReadConfiguration parseConfiguration(std::string_view text, std::string_view name);
+Result<HostConfiguration> parseConfiguration(std::string_view text, std::string_view name);
 
 }  // namespace tarn::linux_host

@@ -24,25 +24,15 @@ HostEnvironment HostEnvironment::current() {
 }
 
 std::optional<std::string> defaultSocketPath(const HostEnvironment& environment) {
-  if (environment.isRoot) {
-    return "/run/tarnreporting/socket";
-  }
-  if (!counts(environment.runtimeDirectory)) {
-    return std::nullopt;
-  }
+  if (environment.isRoot) return "/run/tarnreporting/socket";
+  if (!counts(environment.runtimeDirectory)) return std::nullopt;
   return environment.runtimeDirectory + "/tarnreporting.sock";
 }
 
 std::optional<std::string> defaultStateDirectory(const HostEnvironment& environment) {
-  if (environment.isRoot) {
-    return "/var/lib/tarnreporting";
-  }
-  if (counts(environment.stateHome)) {
-    return environment.stateHome + "/tarnreporting";
-  }
-  if (!counts(environment.home)) {
-    return std::nullopt;
-  }
+  if (environment.isRoot) return "/var/lib/tarnreporting";
+  if (counts(environment.stateHome)) return environment.stateHome + "/tarnreporting";
+  if (!counts(environment.home)) return std::nullopt;
   return environment.home + "/.local/state/tarnreporting";
 }
 

@@ -9,12 +9,13 @@
 #include <utility>
 
 #include "host/log/HostLog.h"
-#include "host/settings/StateFolder.h"
+#include "host/settings/PlainName.h"
 #include "host/system/FileLock.h"
 #include "host/system/FileReplacement.h"
 #include "host/system/Files.h"
 #include "host/system/JsonValues.h"
 #include "host/system/SmallFile.h"
+#include "host/system/SystemError.h"
 
 namespace tarn::linux_host {
 
@@ -23,7 +24,7 @@ namespace {
 constexpr std::string_view kModule = "JsonDefaultsStore";
 constexpr std::string_view kPreferencesUser = "mobile";
 constexpr std::size_t kMaximumCachedSuites = 64;
-constexpr unsigned kFolderMode = 0750;
+constexpr mode_t kFolderMode = 0750;
 // Files are stamped by a clock that moves in steps of some milliseconds: two changes within a step look alike.
 constexpr std::int64_t kSettlingNanoseconds = 100'000'000;
 
@@ -31,16 +32,13 @@ std::int64_t nanoseconds(const timespec& time) {
   return std::int64_t{time.tv_sec} * 1'000'000'000 + time.tv_nsec;
 }
 
-std::string parsed(const std::string& path, std::string_view text, plist::Dictionary& values) {
+JsonDefaultsStore::Suite parsed(const std::string& path, std::string_view text) {
   const JsonReading reading = readJson(text, kMaximumJsonNesting, JsonNull::Absent);
-  if (reading.fault) {
-    return path + ":" + reading.fault->description();
-  }
+  if (reading.fault) return {{}, Error{0, path + ":" + reading.fault->description()}};
   if (reading.value.kind() != plist::Kind::Dictionary) {
-    return path + ":1:1: a defaults file holds one JSON object";
+    return {{}, Error{0, path + ":1:1: a defaults file holds one JSON object"}};
   }
-  values = reading.value.view().dictionary();
-  return {};
+  return {reading.value.view().dictionary(), {}};
 }
 
 }  // namespace
@@ -49,7 +47,7 @@ JsonDefaultsStore::JsonDefaultsStore(std::string folder, platform::Log& log, std
     : folder_(std::move(folder)), log_(log), lockPatience_(lockPatience) {}
 
 plist::Value JsonDefaultsStore::value(std::string_view suiteName, std::string_view key) const {
-  return suite(suiteName).values.get(key);
+  return suite(suiteName).value.get(key);
 }
 
 plist::Value JsonDefaultsStore::preference(std::string_view key, std::string_view applicationDomain,
@@ -58,17 +56,15 @@ plist::Value JsonDefaultsStore::preference(std::string_view key, std::string_vie
 }
 
 bool JsonDefaultsStore::setValue(std::string_view suiteName, std::string_view key, const plist::ValueView& value) {
-  const std::string fault = store(suiteName, key, value);
-  if (!fault.empty()) {
-    hostLog(log_, kHostCategory, platform::LogLevel::Error, kModule, "defaults not written: " + fault);
+  const Status stored = store(suiteName, key, value);
+  if (stored.failed()) {
+    hostLog(log_, kHostCategory, platform::LogLevel::Error, kModule, "defaults not written: " + stored->text);
   }
-  return fault.empty();
+  return stored.ok();
 }
 
 JsonDefaultsStore::Suite JsonDefaultsStore::suite(std::string_view name) const {
-  if (!isPlainName(name)) {
-    return {};
-  }
+  if (!isPlainName(name)) return {};
   const std::string path = pathOf(name);
   struct stat facts {};
   const Stamp now = stampOf(::stat(path.c_str(), &facts), facts);
@@ -89,37 +85,30 @@ JsonDefaultsStore::Suite JsonDefaultsStore::suite(std::string_view name) const {
   return cached.suite;
 }
 
-std::string JsonDefaultsStore::store(std::string_view suiteName, std::string_view key, const plist::ValueView& value) {
-  if (!isPlainName(suiteName)) {
-    return "\"" + std::string(suiteName) + "\" can't name a suite";
-  }
+Status JsonDefaultsStore::store(std::string_view suiteName, std::string_view key, const plist::ValueView& value) {
+  if (!isPlainName(suiteName)) return Error{EINVAL, "\"" + std::string(suiteName) + "\" can't name a suite"};
   const std::string path = pathOf(suiteName);
-  if (const auto error = createDirectories(folder_, kFolderMode)) {
-    return folder_ + errorSuffix(*error);
-  }
+  if (const Status made = createDirectories(folder_, kFolderMode); made.failed()) return errorOf(folder_, *made);
   FileLock writers;
-  if (const int error = writers.take(folder_ + "/.lock", lockPatience_); error != 0) {
-    return folder_ + "/.lock" + errorSuffix(error);
-  }
+  const std::string lock = folder_ + "/.lock";
+  if (const Status taken = writers.take(lock, lockPatience_); taken.failed()) return errorOf(lock, *taken);
   Stamp stamp;
   Suite current = read(path, stamp);
-  if (!current.fault.empty()) {
-    return "the file is broken and is left as it is: " + current.fault;
+  if (current.failed()) {
+    return Error{current.error->code, "the file is broken and is left as it is: " + current.error->text};
   }
   if (value.present()) {
-    current.values.set(key, value);
-  } else if (!current.values.remove(key)) {
+    current.value.set(key, value);
+  } else if (!current.value.remove(key)) {
     return {};
   }
-  const std::optional<std::string> text = jsonText(current.values, JsonLayout::Indented);
-  if (!text) {
-    return "the value of \"" + std::string(key) + "\" has no JSON form";
-  }
+  const std::optional<std::string> text = jsonText(current.value, JsonLayout::Indented);
+  if (!text) return Error{0, "the value of \"" + std::string(key) + "\" has no JSON form"};
   if (text->size() > kMaximumFileBytes) {
-    return path + " would be larger than " + std::to_string(kMaximumFileBytes) + " bytes";
+    return Error{EFBIG, path + " would be larger than " + std::to_string(kMaximumFileBytes) + " bytes"};
   }
-  const auto error = replaceFile(path, folder_ + "/." + std::string(suiteName) + ".tmp", *text);
-  return error ? path + errorSuffix(*error) : std::string();
+  const Status replaced = replaceFile(path, folder_ + "/." + std::string(suiteName) + ".tmp", *text);
+  return replaced.ok() ? Status() : errorOf(path, *replaced);
 }
 
 std::string JsonDefaultsStore::pathOf(std::string_view suiteName) const {
@@ -127,9 +116,7 @@ std::string JsonDefaultsStore::pathOf(std::string_view suiteName) const {
 }
 
 JsonDefaultsStore::Stamp JsonDefaultsStore::stampOf(int result, const struct stat& facts) {
-  if (result != 0) {
-    return {false, errno, 0, 0, 0, 0, 0};
-  }
+  if (result != 0) return {false, errno, 0, 0, 0, 0, 0};
   return {true, 0, facts.st_dev, facts.st_ino, facts.st_size, nanoseconds(facts.st_mtim), nanoseconds(facts.st_ctim)};
 }
 
@@ -147,30 +134,22 @@ JsonDefaultsStore::Suite JsonDefaultsStore::read(const std::string& path, Stamp&
     const int error = errno;
     const int result = ::stat(path.c_str(), &facts);
     stamp = stampOf(result, facts);
-    return error == ENOENT ? Suite() : Suite{{}, path + errorSuffix(error)};
+    return error == ENOENT ? Suite() : Suite{{}, errorOf(path, error)};
   }
   stamp = stampOf(::fstat(file.get(), &facts), facts);
   const auto content = readSmallFile(file.get(), kMaximumFileBytes);
-  if (content.failed()) {
-    return {{}, path + errorSuffix(*content.error)};
-  }
-  Suite suite;
-  suite.fault = parsed(path, content.value, suite.values);
-  return suite;
+  if (content.failed()) return {{}, errorOf(path, *content.error)};
+  return parsed(path, content.value);
 }
 
 void JsonDefaultsStore::logFault(Cached& cached) const {
-  if (cached.suite.fault.empty()) {
-    cached.loggedFault.clear();
-    return;
-  }
-  if (cached.suite.fault == cached.loggedFault && cached.stamp == cached.loggedStamp) {
-    return;
-  }
-  cached.loggedFault = cached.suite.fault;
+  const Status& read = cached.suite.error;
+  if (read == cached.logged && (read.ok() || cached.stamp == cached.loggedStamp)) return;
+  cached.logged = read;
+  if (read.ok()) return;
   cached.loggedStamp = cached.stamp;
   hostLog(log_, kHostCategory, platform::LogLevel::Error, kModule,
-          "defaults file is broken and reads as empty: " + cached.suite.fault);
+          "defaults file is broken and reads as empty: " + read->text);
 }
 
 }  // namespace tarn::linux_host

@@ -26,6 +26,7 @@
 #include "platform/Log.h"
 #include "platform/ThreadSafety.h"
 #include "plist/Dictionary.h"
+#include "plist/Result.h"
 
 namespace tarn::linux_host {
 
@@ -46,14 +47,12 @@ class JsonDefaultsStore final : public platform::DefaultsStore {
   // A failure is logged.
   [[nodiscard]] bool setValue(std::string_view suite, std::string_view key, const plist::ValueView& value) override;
 
-  // A whole suite.
-  struct Suite {
-    plist::Dictionary values;  // empty when there is none or it is broken
-    std::string fault;         // what is wrong with its file: "FILE:LINE:COLUMN: text" or "FILE: text"
-  };
+  // The values of a whole suite, none when there is no such. An error tells what is wrong with its file:
+  // "FILE:LINE:COLUMN: text" or "FILE: text".
+  using Suite = Result<plist::Dictionary>;
   Suite suite(std::string_view name) const;
-  // Stores a value, an absent one removes the key; empty when it is on disk, else what is wrong. Nothing is logged.
-  [[nodiscard]] std::string store(std::string_view suite, std::string_view key, const plist::ValueView& value);
+  // Stores a value, an absent one removes the key; it is on disk when that succeeds. Nothing is logged.
+  [[nodiscard]] Status store(std::string_view suite, std::string_view key, const plist::ValueView& value);
 
  private:
   // Which state of the file was read: another file, size or time is another state.
@@ -72,7 +71,7 @@ class JsonDefaultsStore final : public platform::DefaultsStore {
     bool settled = false;  // a later change is sure to bring another stamp
     Suite suite;
     Stamp loggedStamp;  // of the broken file that was logged last
-    std::string loggedFault;
+    Status logged;
   };
 
   std::string pathOf(std::string_view suite) const;

@@ -5,9 +5,9 @@
 #include <cstddef>
 #include <utility>
 
-#include "host/log/HostLog.h"
 #include "host/system/JsonValues.h"
 #include "host/system/SmallFile.h"
+#include "host/system/SystemError.h"
 
 namespace tarn::linux_host {
 
@@ -20,25 +20,21 @@ constexpr std::array<std::string_view, 2> kKnown{"InternalBuild", "haptics"};
 
 JsonDeviceProperties::JsonDeviceProperties() : properties_{{"InternalBuild", false}, {"haptics", false}} {}
 
-std::string JsonDeviceProperties::load(const std::string& path) {
+Status JsonDeviceProperties::load(const std::string& path) {
   const auto file = readSmallFile(path, kMaximumFileBytes);
-  if (file.failed()) {
-    return path + errorSuffix(*file.error);
-  }
+  if (file.failed()) return errorOf(path, *file.error);
   const JsonReading reading = readJson(file.value);
-  if (reading.fault) {
-    return path + ":" + reading.fault->description();
-  }
+  if (reading.fault) return Error{0, path + ":" + reading.fault->description()};
   if (reading.value.kind() != plist::Kind::Dictionary) {
-    return path + ":1:1: device properties are one JSON object";
+    return Error{0, path + ":1:1: device properties are one JSON object"};
   }
   const plist::Dictionary read = reading.value.view().dictionary();
   std::size_t member = 0;
   for (const plist::Dictionary::Entry& entry : read) {
     const bool known = std::find(kKnown.begin(), kKnown.end(), entry.key.text()) != kKnown.end();
     if (known && entry.value.kind() != plist::Kind::Bool) {
-      return path + ":" + std::to_string(reading.memberLines[member]) + ": \"" + std::string(entry.key.text()) +
-             "\" must be true or false";
+      return Error{0, path + ":" + std::to_string(reading.memberLines[member]) + ": \"" +
+                          std::string(entry.key.text()) + "\" must be true or false"};
     }
     ++member;
   }

@@ -11,6 +11,7 @@
 
 #include "platform/DeviceProperties.h"
 #include "plist/Dictionary.h"
+#include "plist/Result.h"
 
 namespace tarn::linux_host {
 
@@ -19,9 +20,9 @@ class JsonDeviceProperties final : public platform::DeviceProperties {
   // The device without a file.
   JsonDeviceProperties();
 
-  // Takes the properties of the file instead, all or none; empty, or what is wrong: "FILE:LINE:COLUMN: text",
-  // "FILE:LINE: text" or "FILE: text". At most 1 MiB is read.
-  [[nodiscard]] std::string load(const std::string& path);
+  // Takes the properties of the file instead, all or none. An error reads "FILE:LINE:COLUMN: text", "FILE:LINE: text"
+  // or "FILE: text". At most 1 MiB is read.
+  [[nodiscard]] Status load(const std::string& path);
 
   std::optional<bool> boolean(std::string_view name) const override;
 

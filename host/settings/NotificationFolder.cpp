@@ -8,16 +8,17 @@
 #include <cerrno>
 #include <chrono>
 
-#include "host/log/HostLog.h"
-#include "host/settings/StateFolder.h"
+#include "host/settings/PlainName.h"
 #include "host/system/FileLock.h"
+#include "host/system/Files.h"
+#include "host/system/SystemError.h"
 #include "host/system/UniqueDescriptor.h"
 
 namespace tarn::linux_host {
 
 namespace {
 
-constexpr unsigned kFolderMode = 0750;
+constexpr mode_t kFolderMode = 0750;
 constexpr mode_t kFileMode = 0640;
 constexpr std::chrono::milliseconds kLockPatience{1000};
 constexpr std::size_t kWordBytes = 8;
@@ -38,24 +39,22 @@ std::optional<std::uint64_t> readWord(int file) {
   return word;
 }
 
-// 0 or an errno value. One write: one post.
-int writeWord(int file, std::uint64_t word) {
+// One write: one post.
+Status writeWord(int file, std::uint64_t word) {
   Word bytes{};
   for (unsigned char& byte : bytes) {
     byte = static_cast<unsigned char>(word & 0xFFU);
     word >>= 8U;
   }
   const ssize_t written = ::pwrite(file, bytes.data(), bytes.size(), 0);
-  if (written < 0) {
-    return errno;
-  }
-  return written == static_cast<ssize_t>(bytes.size()) ? 0 : ENOSPC;
+  if (written < 0) return lastSystemError();
+  return written == static_cast<ssize_t>(bytes.size()) ? Status() : systemError(ENOSPC);
 }
 
 }  // namespace
 
-int NotificationFolder::make() const {
-  return makeFolder(path_, kFolderMode);
+Status NotificationFolder::make() const {
+  return createDirectories(path_, kFolderMode);
 }
 
 std::optional<std::uint64_t> NotificationFolder::state(std::string_view name) const {
@@ -64,29 +63,23 @@ std::optional<std::uint64_t> NotificationFolder::state(std::string_view name) co
   return file ? readWord(file.get()) : std::nullopt;
 }
 
-std::string NotificationFolder::post(std::string_view name, std::optional<std::uint64_t> state) const {
-  if (!isPlainName(name)) {
-    return "\"" + std::string(name) + "\" can't name a notification";
-  }
-  if (const int error = make(); error != 0) {
-    return path_ + errorSuffix(error);
-  }
+Status NotificationFolder::post(std::string_view name, std::optional<std::uint64_t> state) const {
+  if (!isPlainName(name)) return Error{EINVAL, "\"" + std::string(name) + "\" can't name a notification"};
+  if (const Status made = make(); made.failed()) return errorOf(path_, *made);
   const std::string path = path_ + "/" + std::string(name);
   struct stat facts {};
   const bool existed = ::stat(path.c_str(), &facts) == 0;
   const UniqueDescriptor file(
       ::open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NONBLOCK | O_NOCTTY | O_NOFOLLOW, kFileMode));
-  if (!file) {
-    return path + errorSuffix(errno);
-  }
+  if (!file) return errorOf(path, errno);
   if (!existed) {
     giveToFolderOwner(file.get(), path_);
   }
-  int error = FileLock::take(file.get(), kLockPatience);
-  if (error == 0) {
-    error = writeWord(file.get(), state ? *state : readWord(file.get()).value_or(0));
+  Status written = FileLock::take(file.get(), kLockPatience);
+  if (written.ok()) {
+    written = writeWord(file.get(), state ? *state : readWord(file.get()).value_or(0));
   }
-  return error == 0 ? std::string() : path + errorSuffix(error);
+  return written.ok() ? Status() : errorOf(path, *written);
 }
 
 }  // namespace tarn::linux_host

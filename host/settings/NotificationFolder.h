@@ -8,6 +8,8 @@
 #include <string_view>
 #include <utility>
 
+#include "plist/Result.h"
+
 namespace tarn::linux_host {
 
 class NotificationFolder {
@@ -16,13 +18,12 @@ class NotificationFolder {
   explicit NotificationFolder(std::string path) : path_(std::move(path)) {}
 
   const std::string& path() const noexcept { return path_; }
-  // Makes the folder where there is none; 0 or an errno value.
-  int make() const;
+  // Makes the folder where there is none.
+  Status make() const;
   // Nothing for a file that is missing, short or unreadable.
   std::optional<std::uint64_t> state(std::string_view name) const;
-  // Sets the word, if one is given, and posts; empty, or what went wrong. Writers of a word take turns, each waiting at
-  // most a second.
-  [[nodiscard]] std::string post(std::string_view name, std::optional<std::uint64_t> state) const;
+  // Sets the word, if one is given, and posts. Writers of a word take turns, each waiting at most a second.
+  [[nodiscard]] Status post(std::string_view name, std::optional<std::uint64_t> state) const;
 
  private:
   const std::string path_;

@@ -2,6 +2,7 @@
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
+#include <utility>
 
 #include "host/log/LogLine.h"
 
@@ -71,7 +72,7 @@ void addOptions(CLI::App& app, RawOptions& raw) {
 
 ServiceCommand refuse(std::string text) {
   std::replace(text.begin(), text.end(), '\n', ' ');
-  return {std::nullopt, kExitUsage, {}, std::string(kProgram) + ": " + text + "\n"};
+  return {std::nullopt, {}, Error{kExitUsage, std::move(text)}};
 }
 
 std::optional<std::string> orNothing(const std::string& text) {
@@ -92,18 +93,16 @@ ServiceCommand parseServiceCommand(int argumentCount, const char* const* argumen
   try {
     app.parse(argumentCount, arguments);
   } catch (const CLI::CallForHelp&) {
-    return {std::nullopt, kExitSuccess, app.help(), {}};
+    return {std::nullopt, app.help(), {}};
   } catch (const CLI::CallForVersion&) {
-    return {std::nullopt, kExitSuccess, std::string(kVersion) + "\n", {}};
+    return {std::nullopt, std::string(kVersion) + "\n", {}};
   } catch (const CLI::ParseError& fault) {
     return refuse(fault.what());
   }
   ServiceOptions options;
   const std::optional<std::string> stateDirectory =
       raw.stateDirectory.empty() ? defaultStateDirectory(environment) : std::optional(raw.stateDirectory);
-  if (!stateDirectory) {
-    return refuse("--state-dir: must be given, neither XDG_STATE_HOME nor HOME names a folder");
-  }
+  if (!stateDirectory) return refuse("--state-dir: must be given, neither XDG_STATE_HOME nor HOME names a folder");
   options.socketPath = raw.socketPath.empty() ? defaultSocketPath(environment) : std::optional(raw.socketPath);
   options.socketIsDefault = raw.socketPath.empty();
   options.stateDirectory = *stateDirectory;
@@ -111,7 +110,7 @@ ServiceCommand parseServiceCommand(int argumentCount, const char* const* argumen
   options.devicePropertiesFile = orNothing(raw.devicePropertiesFile);
   options.logLevel = *logLevelFromName(raw.logLevel);
   options.logTarget = raw.logTarget;
-  return {std::move(options), kExitSuccess, {}, {}};
+  return {std::move(options), {}, {}};
 }
 
 }  // namespace tarn::linux_host

@@ -6,6 +6,7 @@
 
 #include "host/settings/HostPaths.h"
 #include "platform/Log.h"
+#include "plist/Result.h"
 
 namespace tarn::linux_host {
 
@@ -28,10 +29,9 @@ struct ServiceOptions {
 
 // What a command line asks for.
 struct ServiceCommand {
-  std::optional<ServiceOptions> options;  // nothing: print what there is and exit with the status
-  int exitStatus = kExitSuccess;
-  std::string output;     // for stdout: the help or the version
-  std::string complaint;  // for stderr: one line that names the option, with its line end
+  std::optional<ServiceOptions> options;  // nothing: print what there is and exit
+  std::string output;                     // for stdout: the help or the version
+  Status usage;                           // wrong: the code is the exit status, the text names the option
 };
 
 ServiceCommand parseServiceCommand(int argumentCount, const char* const* arguments, const HostEnvironment& environment);

@@ -57,9 +57,7 @@ class ConnectionHost {
     if (halfFrames.overfull()) {
       halfFrames.sweep(loop.clock().monotonic());
     }
-    if (halfFrames.empty() || std::exchange(watchesHalfFrames_, true)) {
-      return;
-    }
+    if (halfFrames.empty() || std::exchange(watchesHalfFrames_, true)) return;
     const WorkLane::Scope nobodys(nullptr);
     loop.queue()->asyncAfter(limits.halfFrameTime / kLooksAtHalfFrames, [this] {
       watchesHalfFrames_ = false;

@@ -26,9 +26,7 @@ std::shared_ptr<ShareParty> FairShares::partyOf(std::uint32_t user) {
 }
 
 void FairShares::ready(const std::shared_ptr<ShareHolder>& holder) {
-  if (std::exchange(holder->queued_, true)) {
-    return;
-  }
+  if (std::exchange(holder->queued_, true)) return;
   const std::shared_ptr<ShareParty>& party = holder->party_;
   (holder->credit_ < 0 ? party->seats : party->fresh).push_back(holder);
   if (!std::exchange(party->queued, true)) {

@@ -101,12 +101,8 @@ class FairShares {
   template <class IsOpen>
   bool serve(std::int64_t budget, IsOpen isOpen) {
     while (!parties_.empty()) {
-      if (!isOpen()) {
-        return false;
-      }
-      if (budget <= 0) {
-        return true;
-      }
+      if (!isOpen()) return false;
+      if (budget <= 0) return true;
       budget -= serveOne();
     }
     return false;

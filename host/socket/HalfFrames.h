@@ -47,9 +47,7 @@ class HalfFrames {
       bytes_ -= (*place)->bytes;
       entries_.erase(*std::exchange(place, std::nullopt));
     }
-    if (bytes == 0) {
-      return;
-    }
+    if (bytes == 0) return;
     if (!place) {
       place = entries_.insert(entries_.end(), Entry{holder, now, 0});
     }

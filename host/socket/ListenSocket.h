@@ -9,18 +9,16 @@
 
 #include <sys/types.h>
 
-#include <optional>
 #include <string>
 
 #include "host/system/UniqueDescriptor.h"
+#include "plist/Result.h"
 
 namespace tarn::linux_host {
 
 class ListenSocket {
  public:
   static constexpr mode_t kDefaultMode = 0660;
-
-  struct Result;
 
   ListenSocket() = default;
   ListenSocket(ListenSocket&& other) noexcept;
@@ -32,12 +30,13 @@ class ListenSocket {
 
   // The socket that the service manager handed over (LISTEN_FDS), taken out of the environment. Neither socket nor
   // error when it handed over none; an error when it is more than one or not a listening Unix stream socket.
-  static Result takeHandedOver();
+  static Result<ListenSocket> takeHandedOver();
   // The right to this path, which no other service gets from here on. Nothing is there to connect to before listen().
-  static Result claim(const std::string& path);
+  // An error is one line that names the path.
+  static Result<ListenSocket> claim(const std::string& path);
   // Listens at the claimed path, with this file mode before anybody can connect; one that was handed over listens
-  // already. What went wrong, or nothing.
-  [[nodiscard]] std::string listen(mode_t mode = kDefaultMode);
+  // already.
+  [[nodiscard]] Status listen(mode_t mode = kDefaultMode);
 
   int descriptor() const noexcept { return socket_.get(); }
   // Whether there is one, claimed or listening.
@@ -53,11 +52,6 @@ class ListenSocket {
   std::string name_;
   dev_t device_ = 0;  // with the inode: which file is ours
   ino_t inode_ = 0;
-};
-
-struct ListenSocket::Result {
-  ListenSocket socket;
-  std::string error;  // one line that names the path; empty when nothing went wrong
 };
 
 }  // namespace tarn::linux_host

@@ -16,15 +16,11 @@ std::string overQuota(std::string_view quota, std::size_t use, std::size_t limit
 }
 
 bool beyondRate(MessageRate& rate, std::size_t limit, std::int64_t second) noexcept {
-  if (limit == 0) {
-    return false;
-  }
+  if (limit == 0) return false;
   if (rate.second != second) {
     rate = {second, 0};
   }
-  if (rate.messages >= limit) {
-    return true;
-  }
+  if (rate.messages >= limit) return true;
   ++rate.messages;
   return false;
 }
@@ -39,9 +35,7 @@ plist::Dictionary quotaStatus(const HostLimits::Quotas& quotas, const FairShares
                                  {"messages_per_second_per_user", quotas.messagesPerSecondPerUser}};
   plist::Dictionary users;
   shares.forEachParty([&](const ShareParty& party) {
-    if (users.size() == kMostUsers) {
-      return;
-    }
+    if (users.size() == kMostUsers) return;
     const plist::Dictionary use{
         {"connections", party.connections}, {"sessions", party.sessions}, {"waiting_bytes", party.waitingBytes}};
     users.set(plist::Key(std::to_string(party.user)), use);

@@ -22,9 +22,7 @@ class ReplyTicket {
   template <class Send>
   void answer(const std::optional<platform::RemoteError>& error, Send send) {
     const auto sink = sink_.lock();
-    if (sink == nullptr) {
-      return;
-    }
+    if (sink == nullptr) return;
     if (std::exchange(answered_, true)) {
       sink->dropReply();
     } else if (error) {

@@ -56,9 +56,7 @@ void SocketConnection::setExportedObject(std::shared_ptr<platform::TarnReporting
 }
 
 void SocketConnection::resume() {
-  if (state_ != State::Fresh) {
-    return;
-  }
+  if (state_ != State::Fresh) return;
   state_ = State::Open;
   ++host_.ledger.connectionsOpen;
   ++host_.ledger.connectionsTotal;
@@ -73,15 +71,13 @@ void SocketConnection::refuse(std::string why) {
 
 // Keeps the system's idea of what to wait for in step; asks it only when something changes.
 void SocketConnection::watch(std::uint32_t events) {
-  if (events == watchedEvents_) {
-    return;
-  }
+  if (events == watchedEvents_) return;
   const std::uint32_t before = std::exchange(watchedEvents_, events);
   if (events == 0) {
     host_.loop.unwatch(socket_.get());
   } else if (before != 0) {
     host_.loop.change(socket_.get(), events);
-  } else if (!host_.loop.watch(socket_.get(), events, shared_from_this())) {
+  } else if (host_.loop.watch(socket_.get(), events, shared_from_this()).failed()) {
     watchedEvents_ = 0;
     cut(CutReason::Reset, "can't wait for it" + errorSuffix(errno));
   }
@@ -91,9 +87,7 @@ void SocketConnection::handleEvents(std::uint32_t events) {
   if ((events & EPOLLOUT) != 0) {
     flush();
   }
-  if (state_ != State::Open || (events & (EPOLLIN | EPOLLHUP | EPOLLERR)) == 0) {
-    return;
-  }
+  if (state_ != State::Open || (events & (EPOLLIN | EPOLLHUP | EPOLLERR)) == 0) return;
   peerGone_ = peerGone_ || (events & EPOLLHUP) != 0;
   if (host_.gate.open()) {
     inputWaits_ = true;
@@ -108,9 +102,7 @@ void SocketConnection::stopAtHead(std::uint32_t events) {
   if (!heldRequest_ && lane_.empty()) {
     bool received = false;
     while (state_ == State::Open && !heldRequest_) {
-      if (!serveNextFrame() && (std::exchange(received, true) || !receive())) {
-        return;
-      }
+      if (!serveNextFrame() && (std::exchange(received, true) || !receive())) return;
     }
     return;
   }
@@ -151,9 +143,7 @@ ShareHolder::Turn SocketConnection::takeTurn(std::int64_t credit) {
   bool more = true;
   while (more && lane_.hasTurn()) {
     more = serveNext();
-    if (heldRequest_) {
-      break;
-    }
+    if (heldRequest_) break;
   }
   countSessions();
   if (!more) {
@@ -198,9 +188,7 @@ bool SocketConnection::serveNext() {
     host_.loop.queue()->runLane(lane_);
     return true;
   }
-  if (state_ != State::Open) {
-    return false;
-  }
+  if (state_ != State::Open) return false;
   if (heldRequest_) {
     host_.gate.countReleased();
     wire::DecodedRequest request = std::move(*heldRequest_);
@@ -236,15 +224,15 @@ void SocketConnection::serveFrame(std::span<const std::byte> frame) {
   framesTaken_ = true;
   wire::DecodedRequest& request = host_.request;
   switch (host_.decoder.decode(frame, request, host_.refusal)) {
-    case wire::DecodeOutcome::Ok:
+    case wire::DecodeVerdict::Ok:
       serveRequest(request, frame.size());
       break;
-    case wire::DecodeOutcome::Refused:
+    case wire::DecodeVerdict::Refused:
       lane_.spend(costOf(request, frame.size()));
       host_.ledger.countRefusal(host_.refusal.code);
       sendError(request.id, {wire::kErrorDomain, static_cast<std::int64_t>(host_.refusal.code), host_.refusal.text});
       break;
-    case wire::DecodeOutcome::Unreadable:
+    case wire::DecodeVerdict::Unreadable:
       cut(CutReason::UnreadableFrame, "unreadable frame: " + host_.refusal.text);
       break;
   }
@@ -311,9 +299,7 @@ void SocketConnection::settle(std::uint64_t id) {
 std::string SocketConnection::quotaRefusal(const wire::Request& request) {
   const HostLimits::Quotas& quotas = host_.limits.quotas;
   if (request.operation == wire::Operation::SendMessage) {
-    if (quotas.messagesPerSecondPerConnection == 0 && quotas.messagesPerSecondPerUser == 0) {
-      return {};
-    }
+    if (quotas.messagesPerSecondPerConnection == 0 && quotas.messagesPerSecondPerUser == 0) return {};
     const auto second = std::chrono::duration_cast<std::chrono::seconds>(host_.loop.clock().monotonic()).count();
     if (beyondRate(rate_, quotas.messagesPerSecondPerConnection, second)) {
       return overQuota("messages_per_second", rate_.messages, quotas.messagesPerSecondPerConnection);
@@ -340,9 +326,7 @@ void SocketConnection::refuseRequest(std::uint64_t id, const std::string& why) {
 }
 
 bool SocketConnection::takesReplies() noexcept {
-  if ((state_ == State::Open || state_ == State::Ending) && !outputBroken_) {
-    return true;
-  }
+  if ((state_ == State::Open || state_ == State::Ending) && !outputBroken_) return true;
   ++host_.ledger.repliesDropped;
   return false;
 }
@@ -389,9 +373,7 @@ void SocketConnection::flush() {
     return;
   }
   flushesPutOff_ = 0;
-  if (!socket_ || !sendSome()) {
-    return;
-  }
+  if (!socket_ || !sendSome()) return;
   if (unsentBytes() == 0) {
     host_.ledger.repliesSent += std::exchange(unsentReplies_, 0);
     dropOutput();

@@ -38,10 +38,8 @@ void SocketListener::close() {
 }
 
 void SocketListener::startAccepting() {
-  if (accepting_ || !socket_) {
-    return;
-  }
-  accepting_ = host_.loop.watch(socket_.descriptor(), EPOLLIN, shared_from_this());
+  if (accepting_ || !socket_) return;
+  accepting_ = host_.loop.watch(socket_.descriptor(), EPOLLIN, shared_from_this()).ok();
   if (!accepting_) {
     pauseAccepting("can't wait for clients" + errorSuffix(errno));
   }
@@ -85,9 +83,7 @@ void SocketListener::take(UniqueDescriptor client) {
     hostLog(host_.log, kHostCategory, platform::LogLevel::Default, kModule, "accepting clients again");
   }
   const auto delegate = delegate_.lock();
-  if (delegate == nullptr) {
-    return;
-  }
+  if (delegate == nullptr) return;
   const auto connection = std::make_shared<SocketConnection>(host_, std::move(client), nextNumber_++);
   const std::size_t limit = host_.limits.quotas.connectionsPerUser;
   const std::size_t use = host_.shares.partyOf(connection->user())->connections;

@@ -16,9 +16,7 @@ constexpr std::size_t kUsualLimit = 1024;
 
 std::size_t raiseDescriptorLimit() noexcept {
   rlimit limit{};
-  if (::getrlimit(RLIMIT_NOFILE, &limit) != 0) {
-    return kUsualLimit;
-  }
+  if (::getrlimit(RLIMIT_NOFILE, &limit) != 0) return kUsualLimit;
   rlimit raised = limit;
   raised.rlim_cur = raised.rlim_max;
   if (::setrlimit(RLIMIT_NOFILE, &raised) != 0) {

@@ -7,17 +7,18 @@
 #include <string>
 
 #include "host/system/UniqueDescriptor.h"
+#include "plist/Result.h"
 
 namespace tarn::linux_host {
 
 class FileLock {
  public:
-  // Takes the lock of an open file; 0, or ETIMEDOUT when another holds it for longer than `patience`, or another errno
-  // value. The lock ends with the descriptor.
-  static int take(int descriptor, std::chrono::milliseconds patience);
+  // Takes the lock of an open file; ETIMEDOUT when another holds it for longer than `patience`. The lock ends with the
+  // descriptor.
+  static Status take(int descriptor, std::chrono::milliseconds patience);
 
   // The same on a file of its own, which is made when it isn't there and stays.
-  int take(const std::string& path, std::chrono::milliseconds patience);
+  Status take(const std::string& path, std::chrono::milliseconds patience);
 
  private:
   UniqueDescriptor file_;

@@ -12,8 +12,6 @@
 
 namespace tarn::linux_host {
 
-using platform::MaybeError;
-
 namespace {
 
 constexpr mode_t kFileMode = 0640;
@@ -23,9 +21,9 @@ std::string folderOf(const std::string& path) {
   return slash == std::string::npos ? "." : path.substr(0, slash + 1);
 }
 
-MaybeError syncFolderOf(const std::string& path) {
+Status syncFolderOf(const std::string& path) {
   const UniqueDescriptor opened(::open(folderOf(path).c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  return opened && ::fsync(opened.get()) == 0 ? MaybeError() : lastSystemError();
+  return opened && ::fsync(opened.get()) == 0 ? Status() : lastSystemError();
 }
 
 }  // namespace
@@ -36,24 +34,34 @@ void FileReplacement::begin(UniqueDescriptor file, std::string beside) noexcept 
 }
 
 void FileReplacement::write(std::string_view bytes) {
-  if (!failure_) failure_ = writeAll(file_.get(), bytes);
+  if (failure_.ok()) {
+    failure_ = writeAll(file_.get(), bytes);
+  }
 }
 
-MaybeError FileReplacement::takePlace(const std::string& path) {
-  if (!failure_ && ::fsync(file_.get()) != 0) failure_ = lastSystemError();
+Status FileReplacement::takePlace(const std::string& path) {
+  if (failure_.ok() && ::fsync(file_.get()) != 0) {
+    failure_ = lastSystemError();
+  }
   file_.reset();
-  if (!failure_ && std::rename(beside_.c_str(), path.c_str()) != 0) failure_ = lastSystemError();
-  if (!failure_) beside_.clear();
+  if (failure_.ok() && std::rename(beside_.c_str(), path.c_str()) != 0) {
+    failure_ = lastSystemError();
+  }
+  if (failure_.ok()) {
+    beside_.clear();
+  }
   discard();
   return failure_;
 }
 
 void FileReplacement::discard() noexcept {
-  if (!beside_.empty()) ::unlink(beside_.c_str());
+  if (!beside_.empty()) {
+    ::unlink(beside_.c_str());
+  }
   beside_.clear();
 }
 
-MaybeError replaceFile(const std::string& path, const std::string& temporary, std::string_view content) {
+Status replaceFile(const std::string& path, const std::string& temporary, std::string_view content) {
   struct stat old {};
   const bool existed = ::stat(path.c_str(), &old) == 0;
   UniqueDescriptor file(::open(temporary.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC | O_NOFOLLOW, kFileMode));
@@ -66,7 +74,7 @@ MaybeError replaceFile(const std::string& path, const std::string& temporary, st
   }
   if (::fchmod(descriptor, existed ? old.st_mode & 07777U : kFileMode) != 0) return lastSystemError();
   replacement.write(content);
-  if (auto error = replacement.takePlace(path)) return error;
+  if (auto error = replacement.takePlace(path); error.failed()) return error;
   return syncFolderOf(path);
 }
 

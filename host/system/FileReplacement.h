@@ -8,7 +8,7 @@
 #include <string_view>
 
 #include "host/system/UniqueDescriptor.h"
-#include "platform/Outcome.h"
+#include "plist/Result.h"
 
 namespace tarn::linux_host {
 
@@ -28,22 +28,21 @@ class FileReplacement {
   // After the first failure nothing more is written: after a gap it would be worth nothing.
   void write(std::string_view bytes);
   // The first one.
-  const platform::MaybeError& failure() const noexcept { return failure_; }
+  const Status& failure() const noexcept { return failure_; }
 
   // Brings it to the disk and under its name, and closes it. Nothing of it is left when that or a write failed.
-  [[nodiscard]] platform::MaybeError takePlace(const std::string& path);
+  [[nodiscard]] Status takePlace(const std::string& path);
 
  private:
   void discard() noexcept;
 
   UniqueDescriptor file_;
   std::string beside_;  // empty while there is no file of that name
-  platform::MaybeError failure_;
+  Status failure_;
 };
 
 // Replaces a file whole, by way of `temporary` in the same folder. A file that was there hands down its mode and, from
 // root's hands, its owner. The new name is on the disk too when this returns.
-[[nodiscard]] platform::MaybeError replaceFile(const std::string& path, const std::string& temporary,
-                                               std::string_view content);
+[[nodiscard]] Status replaceFile(const std::string& path, const std::string& temporary, std::string_view content);
 
 }  // namespace tarn::linux_host

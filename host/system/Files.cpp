@@ -7,9 +7,7 @@
 
 namespace tarn::linux_host {
 
-using platform::MaybeError;
-
-MaybeError writeAll(int descriptor, std::string_view bytes) {
+Status writeAll(int descriptor, std::string_view bytes) {
   while (!bytes.empty()) {
     const ssize_t written = ::write(descriptor, bytes.data(), bytes.size());
     if (written >= 0) {
@@ -21,7 +19,7 @@ MaybeError writeAll(int descriptor, std::string_view bytes) {
   return {};
 }
 
-MaybeError createDirectories(const std::string& path, mode_t mode) {
+Status createDirectories(const std::string& path, mode_t mode) {
   for (std::size_t slash = path.find('/', 1);; slash = path.find('/', slash + 1)) {
     const std::string part = path.substr(0, slash);
     if (::mkdir(part.c_str(), mode) != 0) {

@@ -6,16 +6,16 @@
 #include <string>
 #include <string_view>
 
-#include "platform/Outcome.h"
+#include "plist/Result.h"
 
 namespace tarn::linux_host {
 
 // Writes all of it, however many pieces the system takes it in. After an error some of it may be written.
-[[nodiscard]] platform::MaybeError writeAll(int descriptor, std::string_view bytes);
+[[nodiscard]] Status writeAll(int descriptor, std::string_view bytes);
 
 // Makes the directory and what is missing above it, each with this mode less the process's mask. One that is there
 // already is left as it is, and that is a success.
-[[nodiscard]] platform::MaybeError createDirectories(const std::string& path, mode_t mode);
+[[nodiscard]] Status createDirectories(const std::string& path, mode_t mode);
 
 // When root works on the state of a service that runs as another user, a file that root made new goes to the owner of
 // the folder that it lies in, or the service couldn't read it. For others nothing happens.

@@ -14,9 +14,9 @@ namespace {
 constexpr std::size_t kMostEntries = 16384;
 }
 
-platform::Outcome<FolderNames> folderNames(const std::string& folder, std::size_t limit,
-                                           const std::function<bool(std::string_view)>& isWanted) {
-  platform::Outcome<FolderNames> found;
+Result<FolderNames> folderNames(const std::string& folder, std::size_t limit,
+                                const std::function<bool(std::string_view)>& isWanted) {
+  Result<FolderNames> found;
   auto& [names, complete] = found.value;
   const std::unique_ptr<DIR, int (*)(DIR*)> directory(::opendir(folder.c_str()), &::closedir);
   if (directory == nullptr) {
@@ -27,12 +27,12 @@ platform::Outcome<FolderNames> folderNames(const std::string& folder, std::size_
     errno = 0;
     const dirent* const entry = ::readdir(directory.get());  // NOLINT(concurrency-mt-unsafe): a stream of our own
     if (entry == nullptr) {
-      if (errno != 0) found.error = lastSystemError();
+      if (errno != 0) {
+        found.error = lastSystemError();
+      }
       return found;
     }
-    if (!isWanted(entry->d_name)) {
-      continue;
-    }
+    if (!isWanted(entry->d_name)) continue;
     names.insert(entry->d_name);
     if (names.size() > limit) {
       names.erase(std::prev(names.end()));

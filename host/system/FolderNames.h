@@ -7,7 +7,7 @@
 #include <string>
 #include <string_view>
 
-#include "platform/Outcome.h"
+#include "plist/Result.h"
 
 namespace tarn::linux_host {
 
@@ -18,7 +18,7 @@ struct FolderNames {
 
 // The first names in their order, at most `limit`, of those that are wanted. A folder with very many entries is not
 // looked at to its end. Beside an error stands what was found before it.
-platform::Outcome<FolderNames> folderNames(const std::string& folder, std::size_t limit,
-                                           const std::function<bool(std::string_view)>& isWanted);
+Result<FolderNames> folderNames(const std::string& folder, std::size_t limit,
+                                const std::function<bool(std::string_view)>& isWanted);
 
 }  // namespace tarn::linux_host

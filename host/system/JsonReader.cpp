@@ -102,9 +102,7 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
     return value <= static_cast<std::uint64_t>(INT64_MAX) ? add(static_cast<std::int64_t>(value)) : add(value);
   }
   bool number_float(double value, const std::string& written) override {
-    if (written.find_first_of(".eE") == std::string::npos) {
-      return fail("the integer is outside -2^63 to 2^64-1");
-    }
+    if (written.find_first_of(".eE") == std::string::npos) return fail("the integer is outside -2^63 to 2^64-1");
     return add(value);
   }
   bool string(std::string& value) override { return add(std::string_view(value)); }
@@ -122,17 +120,11 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
     std::optional<plist::Dictionary> finished = builder_.finishDictionary(cache_);
     keys_.resize(levels_.back().keysBegin);
     levels_.pop_back();
-    if (!finished) {
-      return fail("a member stands twice in the object that ends here");
-    }
+    if (!finished) return fail("a member stands twice in the object that ends here");
     if (finished->size() == 1) {
       const plist::Dictionary::Entry entry = *finished->begin();
-      if (entry.key.text() == "$date") {
-        return addDate(entry.value);
-      }
-      if (entry.key.text() == "$data") {
-        return addData(entry.value);
-      }
+      if (entry.key.text() == "$date") return addDate(entry.value);
+      if (entry.key.text() == "$data") return addData(entry.value);
     }
     return add(*finished);
   }
@@ -172,16 +164,12 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
     return true;
   }
   bool addDate(const plist::ValueView& seconds) {
-    if (!seconds.isNumber() || seconds.kind() == plist::Kind::Bool) {
-      return fail("$date wants a number of seconds");
-    }
+    if (!seconds.isNumber() || seconds.kind() == plist::Kind::Bool) return fail("$date wants a number of seconds");
     return add(plist::Date{seconds.asDouble()});
   }
   bool addData(const plist::ValueView& base64) {
     const std::optional<std::string> bytes = base64.isText() ? plist::decodeBase64(base64.text()) : std::nullopt;
-    if (!bytes) {
-      return fail("$data wants a base64 text");
-    }
+    if (!bytes) return fail("$data wants a base64 text");
     return add(plist::DataView{*bytes});
   }
   bool fail(std::string text) { return failAt(read_, std::move(text)); }
@@ -196,9 +184,7 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
     const auto at = [this](std::size_t n) {
       return text_.begin() + static_cast<std::ptrdiff_t>(std::min(n, text_.size()));
     };
-    if (offset < countedTo_) {
-      return 1 + static_cast<std::size_t>(std::count(text_.begin(), at(offset), '\n'));
-    }
+    if (offset < countedTo_) return 1 + static_cast<std::size_t>(std::count(text_.begin(), at(offset), '\n'));
     line_ += static_cast<std::size_t>(std::count(at(countedTo_), at(offset), '\n'));
     countedTo_ = offset;
     return line_;

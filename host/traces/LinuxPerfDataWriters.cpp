@@ -15,9 +15,6 @@
 
 namespace tarn::linux_host {
 
-using platform::MaybeError;
-using platform::Outcome;
-
 namespace {
 
 constexpr std::size_t kBlockBytes = std::size_t{64} * 1024;
@@ -75,7 +72,9 @@ class Writer final : public platform::PerfDataWriter {
   }
   void stringMember(Extension extension, std::string_view name, std::string_view text) override {
     if (extension != open_ || open_ == 0) return;
-    if (std::exchange(hasMembers_, true)) extensions_ += ", ";
+    if (std::exchange(hasMembers_, true)) {
+      extensions_ += ", ";
+    }
     appendText(extensions_, name);
     extensions_ += ": ";
     appendText(extensions_, text);
@@ -86,7 +85,7 @@ class Writer final : public platform::PerfDataWriter {
     open_ = 0;
   }
 
-  MaybeError close() override {
+  Status close() override {
     if (!file_.isOpen()) return systemError(EBADF);
     endExtension(open_);
     text_ += hasValues_ ? "\n  ],\n  \"extensions\": [" : "],\n  \"extensions\": [";
@@ -114,20 +113,16 @@ class Writer final : public platform::PerfDataWriter {
 
 }  // namespace
 
-Outcome<std::unique_ptr<platform::PerfDataWriter>> LinuxPerfDataWriters::open(std::string_view path,
-                                                                              std::string_view name,
-                                                                              std::int32_t resultsVersion,
-                                                                              std::uint32_t flags) {
-  if (flags != 0) {
-    return {nullptr, systemError(EINVAL)};
-  }
+Result<std::unique_ptr<platform::PerfDataWriter>> LinuxPerfDataWriters::open(std::string_view path,
+                                                                             std::string_view name,
+                                                                             std::int32_t resultsVersion,
+                                                                             std::uint32_t flags) {
+  if (flags != 0) return {nullptr, systemError(EINVAL)};
   std::string place(path);
   std::string beside = place + "." + std::to_string(::getpid()) + "." + std::to_string(++opened_);
   ::unlink(beside.c_str());  // what an earlier process of this number left
   UniqueDescriptor file(::open(beside.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, kFilePermissions));
-  if (!file) {
-    return {nullptr, lastSystemError()};
-  }
+  if (!file) return {nullptr, lastSystemError()};
   return {std::make_unique<Writer>(std::move(file), std::move(beside), std::move(place), name, resultsVersion), {}};
 }
 

@@ -32,9 +32,8 @@ class LinuxPerfDataWriters final : public platform::PerfDataWriters {
   LinuxPerfDataWriters& operator=(const LinuxPerfDataWriters&) = delete;
 
   // There are no flags: with any the error is EINVAL.
-  platform::Outcome<std::unique_ptr<platform::PerfDataWriter>> open(std::string_view path, std::string_view name,
-                                                                    std::int32_t resultsVersion,
-                                                                    std::uint32_t flags) override;
+  Result<std::unique_ptr<platform::PerfDataWriter>> open(std::string_view path, std::string_view name,
+                                                         std::int32_t resultsVersion, std::uint32_t flags) override;
 
  private:
   std::atomic<unsigned> opened_ = 0;  // so that no two writers share a name

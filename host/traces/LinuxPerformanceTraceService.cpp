@@ -4,6 +4,7 @@
 
 #include "host/log/HostLog.h"
 #include "host/traces/TraceThread.h"
+#include "plist/Result.h"
 
 namespace tarn::linux_host {
 
@@ -11,13 +12,14 @@ namespace {
 
 constexpr std::string_view kModule = "PerformanceTrace";
 
-// What is wrong with a configuration; empty when nothing is.
-std::string complaintOf(const platform::PerformanceTraceConfiguration& configuration) {
+// Whether there is such a configuration here.
+Status checked(const platform::PerformanceTraceConfiguration& configuration) {
   if (configuration.templateNumber != TraceRecording::kTemplateOfIntervals &&
       configuration.templateNumber != TraceRecording::kTemplateOfProfiles) {
-    return "there is no performance trace template " + std::to_string(configuration.templateNumber);
+    return Error{0, "there is no performance trace template " + std::to_string(configuration.templateNumber)};
   }
-  return configuration.compressWhenFinished ? "performance traces are not compressed here" : "";
+  if (configuration.compressWhenFinished) return Error{0, "performance traces are not compressed here"};
+  return {};
 }
 
 }  // namespace
@@ -37,10 +39,14 @@ class LinuxPerformanceTraceService::Session final : public platform::Performance
     recording_->setDelegate(std::move(delegate));
   }
   void startTrace() override {
-    if (recording_->askForStart()) thread_->post(TraceThread::Verb::Start, recording_);
+    if (recording_->askForStart()) {
+      thread_->post(TraceThread::Verb::Start, recording_);
+    }
   }
   void stopTrace() override {
-    if (recording_->askForStop()) thread_->post(TraceThread::Verb::Stop, recording_);
+    if (recording_->askForStop()) {
+      thread_->post(TraceThread::Verb::Stop, recording_);
+    }
   }
   bool isValid() const override { return recording_->isValid(); }
   std::uint64_t eventsLeftOut() const override { return recording_->eventsLeftOut(); }
@@ -60,10 +66,12 @@ LinuxPerformanceTraceService::~LinuxPerformanceTraceService() {
 
 std::shared_ptr<platform::PerformanceTraceSession> LinuxPerformanceTraceService::createSession(
     const platform::PerformanceTraceConfiguration& configuration) {
-  std::string complaint = complaintOf(configuration);
-  if (complaint.empty() && !thread_->run()) complaint = "performance traces have no thread to run on";
-  if (!complaint.empty()) {
-    hostLog(parts_.log, kTraceCategory, platform::LogLevel::Error, kModule, complaint);
+  Status ready = checked(configuration);
+  if (ready.ok() && !thread_->run()) {
+    ready = Error{0, "performance traces have no thread to run on"};
+  }
+  if (ready.failed()) {
+    hostLog(parts_.log, kTraceCategory, platform::LogLevel::Error, kModule, ready->text);
     return nullptr;
   }
   return std::make_shared<Session>(

@@ -35,7 +35,9 @@ std::string jsonOf(const std::vector<plist::Dictionary>& descriptions, platform:
       tell(log, "a probe's description holds what no probe can have");
       continue;
     }
-    if (array.size() > 1) array += ',';
+    if (array.size() > 1) {
+      array += ',';
+    }
     array += *text;
   }
   return array + "]";
@@ -65,7 +67,9 @@ platform::TraceAnalysis::Loaded LinuxTraceAnalysis::load() {
     tell(log_, "the trace-analysis library can't be loaded: " + (reason == nullptr ? path_ : std::string(reason)));
     return *loaded_;
   }
-  if (const auto analysis = makeWith(library, log_)) loaded_ = analysis->load();
+  if (const auto analysis = makeWith(library, log_)) {
+    loaded_ = analysis->load();
+  }
   if (!loaded_->missingClass.empty()) {
     tell(log_, "the trace-analysis library " + path_ + " lacks a class: " + loaded_->missingClass);
   }

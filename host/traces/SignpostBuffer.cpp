@@ -21,7 +21,9 @@ void SignpostBuffer::take(const SignpostRecord& record) noexcept {
     records_.push_back(record);
     isHalfFull = records_.size() == (mostRecords_ + 1) / 2;
   }
-  if (isHalfFull) halfFull_();
+  if (isHalfFull) {
+    halfFull_();
+  }
 }
 
 SignpostBuffer::Content SignpostBuffer::drain(std::vector<SignpostRecord> spare) {

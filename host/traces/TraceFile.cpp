@@ -15,7 +15,6 @@
 
 namespace tarn::linux_host {
 
-using platform::MaybeError;
 using platform::SignpostCategory;
 
 namespace {
@@ -66,15 +65,17 @@ std::string_view nameOf(SignpostCategory category) noexcept {
 
 std::string threadName(std::int32_t thread) {
   auto [name, error] = readSmallFile("/proc/self/task/" + std::to_string(thread) + "/comm", 64);
-  while (name.ends_with('\n')) name.pop_back();
-  return error || name.empty() ? "thread " + std::to_string(thread) : name;
+  while (name.ends_with('\n')) {
+    name.pop_back();
+  }
+  return error.failed() || name.empty() ? "thread " + std::to_string(thread) : name;
 }
 
 }  // namespace
 
 TraceFile::TraceFile(Facts facts) : facts_(std::move(facts)), process_(::getpid()) {}
 
-MaybeError TraceFile::open() {
+Status TraceFile::open() {
   std::string path = facts_.directory + "/." + facts_.name + ".partial";
   UniqueDescriptor made(::open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, kFilePermissions));
   if (!made) return lastSystemError();
@@ -135,12 +136,12 @@ void TraceFile::writeLost(std::uint64_t count, std::chrono::nanoseconds at) {
   static_cast<void>(endEvent(at));
 }
 
-MaybeError TraceFile::flush() {
+Status TraceFile::flush() {
   writeOut();
   return file_.failure();
 }
 
-platform::Outcome<std::string> TraceFile::finish() {
+Result<std::string> TraceFile::finish() {
   put("\n],\n\"displayTimeUnit\":\"ns\",\n\"otherData\":{\"token\":");
   put(jsonOf(facts_.token));
   put(",\"template\":");
@@ -154,7 +155,7 @@ platform::Outcome<std::string> TraceFile::finish() {
   put(full_ ? ",\"full\":true}}\n" : ",\"full\":false}}\n");
   writeOut();
   std::string path = facts_.directory + "/" + facts_.name;
-  if (auto error = file_.takePlace(path)) return {{}, std::move(error)};
+  if (auto error = file_.takePlace(path); error.failed()) return {{}, std::move(error)};
   return {std::move(path), {}};
 }
 
@@ -214,7 +215,9 @@ bool TraceFile::endEvent(std::chrono::nanoseconds at) {
 void TraceFile::put(std::string_view text) {
   heldBack_ += text;
   bytes_ += text.size();
-  if (heldBack_.size() >= kBlockBytes) writeOut();
+  if (heldBack_.size() >= kBlockBytes) {
+    writeOut();
+  }
 }
 
 void TraceFile::writeOut() {

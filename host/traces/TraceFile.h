@@ -18,7 +18,7 @@
 
 #include "host/system/FileReplacement.h"
 #include "host/traces/SignpostBuffer.h"
-#include "platform/Outcome.h"
+#include "plist/Result.h"
 
 namespace tarn::linux_host {
 
@@ -39,15 +39,15 @@ class TraceFile {
   TraceFile& operator=(const TraceFile&) = delete;
 
   // Makes the file. To be called first; nothing else works when it fails.
-  [[nodiscard]] platform::MaybeError open();
+  [[nodiscard]] Status open();
   // Each adds events. They reach the disk in blocks; what fails there is told by the next flush() or finish().
   void write(const SignpostRecord& record);
   void writeCounter(std::string_view name, std::string_view unit, std::int64_t value, std::chrono::nanoseconds at);
   // An event that tells that so many were lost before this moment.
   void writeLost(std::uint64_t count, std::chrono::nanoseconds at);
-  [[nodiscard]] platform::MaybeError flush();
+  [[nodiscard]] Status flush();
   // Completes the file and gives it its name: its path.
-  platform::Outcome<std::string> finish();
+  Result<std::string> finish();
 
   bool isFull() const noexcept { return full_; }
   // Events that are not in the file: lost before, or beyond its bound.

@@ -12,8 +12,6 @@
 namespace tarn::linux_host {
 
 using platform::LogLevel;
-using platform::MaybeError;
-using platform::PlatformError;
 
 namespace {
 
@@ -74,13 +72,13 @@ void TraceRecording::release() noexcept {
 }
 
 void TraceRecording::start(bool hasRoom, std::function<void()> wake) {
-  MaybeError error;
+  Status error;
   if (!hasRoom) {
-    error = PlatformError{EBUSY, "as many traces as may be record already"};
+    error = Error{EBUSY, "as many traces as may be record already"};
   } else {
     error = openFile();
   }
-  if (error) {
+  if (error.failed()) {
     file_.reset();
     const platform::MutexLock lock(mutex_);
     state_ = State::Over;
@@ -97,16 +95,20 @@ void TraceRecording::drain() {
     const platform::MutexLock lock(mutex_);
     buffer = buffer_;
   }
-  if (!isOpen() || buffer == nullptr || failure_) return;
+  if (!isOpen() || buffer == nullptr || failure_.failed()) return;
   SignpostBuffer::Content content = buffer->drain(std::move(spare_));
   for (const SignpostRecord& record : content.records) {
     file_->write(record);
   }
-  if (content.lost > 0) file_->writeLost(content.lost, parts_.clock.monotonic());
-  if (templateNumber_ == kTemplateOfProfiles) sampleLoad();
+  if (content.lost > 0) {
+    file_->writeLost(content.lost, parts_.clock.monotonic());
+  }
+  if (templateNumber_ == kTemplateOfProfiles) {
+    sampleLoad();
+  }
   spare_ = std::move(content.records);
   failure_ = file_->flush();
-  if (failure_) {
+  if (failure_.failed()) {
     endRecording();
     hostLog(parts_.log, kTraceCategory, LogLevel::Error, kModule,
             "performance trace " + token_ + " can't be written and ends here: " + failure_->text);
@@ -118,8 +120,8 @@ void TraceRecording::stop() {
   endRecording();
   drain();
   tell([](auto& delegate) { delegate.performanceTraceDidStop({}); });
-  platform::Outcome<std::string> path{{}, failure_};
-  if (!failure_) {
+  Result<std::string> path{{}, failure_};
+  if (failure_.ok()) {
     path = file_->finish();
     logLeftOut();
     leftOut_ = file_->leftOut();
@@ -128,10 +130,10 @@ void TraceRecording::stop() {
   tell([&](auto& delegate) { delegate.performanceTraceDidComplete(path.value, token_, path.error); });
 }
 
-MaybeError TraceRecording::openFile() {
+Status TraceRecording::openFile() {
   const std::string directory =
       parts_.fileSystem.wellKnownDirectory(platform::WellKnownDirectory::DiagnosticLogs) + std::string(kFolder);
-  if (auto error = parts_.fileSystem.createDirectories(directory, kFolderPermissions)) return error;
+  if (auto error = parts_.fileSystem.createDirectories(directory, kFolderPermissions); error.failed()) return error;
   const double now = parts_.clock.epochSeconds();
   file_ = std::make_unique<TraceFile>(TraceFile::Facts{directory, fileName(now, number_), token_, templateNumber_,
                                                        templateNumber_ == kTemplateOfProfiles, limits_.mostBytes, now});
@@ -149,14 +151,16 @@ bool TraceRecording::beginRecording(std::function<void()> wake) {
 
 void TraceRecording::endRecording() noexcept {
   const platform::MutexLock lock(mutex_);
-  if (buffer_ != nullptr) parts_.signposts.remove(buffer_.get());
+  if (buffer_ != nullptr) {
+    parts_.signposts.remove(buffer_.get());
+  }
 }
 
 void TraceRecording::sampleLoad() {
   const auto now = parts_.clock.monotonic();
   file_->writeCounter("processor time", "microseconds", parts_.clock.processorTicks(), now);
-  if (const auto footprint = parts_.processFacts.physicalFootprint().bytes) {
-    file_->writeCounter("memory", "bytes", static_cast<std::int64_t>(*footprint), now);
+  if (const auto footprint = parts_.processFacts.physicalFootprint(); footprint.ok()) {
+    file_->writeCounter("memory", "bytes", static_cast<std::int64_t>(footprint.value), now);
   }
 }
 
@@ -173,9 +177,13 @@ void TraceRecording::tell(const Call& call) {
   std::shared_ptr<platform::PerformanceTraceDelegate> delegate;
   {
     const platform::MutexLock lock(mutex_);
-    if (!released_) delegate = delegate_.lock();
+    if (!released_) {
+      delegate = delegate_.lock();
+    }
   }
-  if (delegate != nullptr) call(*delegate);
+  if (delegate != nullptr) {
+    call(*delegate);
+  }
 }
 
 }  // namespace tarn::linux_host

@@ -77,7 +77,7 @@ class TraceRecording {
     Over,
   };
 
-  platform::MaybeError openFile();
+  Status openFile();
   bool beginRecording(std::function<void()> wake);
   void endRecording() noexcept;
   void sampleLoad();
@@ -94,7 +94,7 @@ class TraceRecording {
   // The traces' thread's own.
   std::unique_ptr<TraceFile> file_;
   std::vector<SignpostRecord> spare_;
-  platform::MaybeError failure_;  // of the disk
+  Status failure_;  // of the disk
 
   std::atomic<std::uint64_t> leftOut_{0};  // set before the completion
   mutable platform::Mutex mutex_;

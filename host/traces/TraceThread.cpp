@@ -35,7 +35,9 @@ void TraceThread::end() {
     thread = std::move(thread_);
     changed_.notifyOne();
   }
-  if (thread.joinable()) thread.join();
+  if (thread.joinable()) {
+    thread.join();
+  }
 }
 
 void TraceThread::work() {
@@ -75,7 +77,9 @@ void TraceThread::carryOut(const Command& command) {
   switch (command.verb) {
     case Verb::Start:
       recording.start(open_.size() < limits_.mostTraces, [this] { wake(); });
-      if (recording.isOpen()) open_.push_back(command.recording);
+      if (recording.isOpen()) {
+        open_.push_back(command.recording);
+      }
       return;
     case Verb::Stop:
       recording.stop();

@@ -25,18 +25,14 @@ void appendBase64(std::string& out, std::string_view bytes) {
 }
 
 std::optional<std::string> decodeBase64(std::string_view text) {
-  if (text.size() % 4 != 0) {
-    return std::nullopt;
-  }
+  if (text.size() % 4 != 0) return std::nullopt;
   const std::size_t padding = text.ends_with("==") ? 2 : (text.ends_with('=') ? 1 : 0);
   std::string bytes;
   std::uint32_t bits = 0;
   int held = 0;
   for (const char c : text.substr(0, text.size() - padding)) {
     const std::size_t digit = kBase64Alphabet.find(c);
-    if (digit == std::string_view::npos) {
-      return std::nullopt;
-    }
+    if (digit == std::string_view::npos) return std::nullopt;
     bits = (bits << 6U) | static_cast<std::uint32_t>(digit);
     held += 6;
     if (held >= 8) {

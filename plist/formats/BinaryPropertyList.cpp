@@ -149,7 +149,7 @@ class BinaryReader {
     value = number(taken);
     return true;
   }
-  // The count that a mark's lower half tells, or the integer behind it.
+  // The count that a mark's lower half tells, or the integer after it.
   bool takeCount(unsigned mark, std::uint64_t& count) {
     count = mark & 0xFU;
     if (count < 0xF) return true;
@@ -296,7 +296,9 @@ class BinaryReader {
     return countValues(known.values) && spend(known.content) && addContainer(known);
   }
   bool addContainer(const Finished& made) {
-    if (!levels_.empty()) levels_.back().height = std::max(levels_.back().height, made.height + 1);
+    if (!levels_.empty()) {
+      levels_.back().height = std::max(levels_.back().height, made.height + 1);
+    }
     return add(made.value);
   }
 
@@ -331,7 +333,7 @@ class BinaryReader {
   PackedBuilder builder_;
   std::vector<Level> levels_;
   std::unordered_map<std::size_t, Finished> finished_;    // by offset
-  std::unordered_map<std::size_t, std::string> decoded_;  // by offset, behind the mark; a node's text doesn't move
+  std::unordered_map<std::size_t, std::string> decoded_;  // by offset, after the mark; a node's text doesn't move
   std::size_t values_ = 0;
   std::uint64_t content_ = 0;
   std::string fault_;

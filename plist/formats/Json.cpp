@@ -57,9 +57,7 @@ void appendShortestDouble(std::string& out, double number) {
 
 void appendJsonDate(std::string& out, Date date) {
   const auto calendar = calendarDate(date.epochSeconds);
-  if (!calendar) {
-    return appendFloating(out, date.epochSeconds);
-  }
+  if (!calendar) return appendFloating(out, date.epochSeconds);
   out += '"';
   appendDateAndTime(out, *calendar, 'T');
   if (calendar->microsecond != 0) {
@@ -195,7 +193,9 @@ class Writer {
     for (const ValueView& item : array) {
       separate(index == 0);
       if (!write(item)) {
-        if constexpr (kPolicy == Policy::SortedPretty) place_.push_back("[" + std::to_string(index) + "]");
+        if constexpr (kPolicy == Policy::SortedPretty) {
+          place_.push_back("[" + std::to_string(index) + "]");
+        }
         return false;
       }
       ++index;
@@ -250,12 +250,16 @@ class Writer {
     return level_ <= kMaximumJsonNesting || refuse("such a depth");
   }
   void separate(bool isFirst) {
-    if (!isFirst) out_ += kPolicy == Policy::RoundTrip && layout_ == JsonLayout::OneLine ? ", " : ",";
+    if (!isFirst) {
+      out_ += kPolicy == Policy::RoundTrip && layout_ == JsonLayout::OneLine ? ", " : ",";
+    }
     beginLine();
   }
   void close(char bracket, bool isEmpty) {
     --level_;
-    if (!isEmpty) beginLine();
+    if (!isEmpty) {
+      beginLine();
+    }
     out_ += bracket;
   }
   void beginLine() {
@@ -289,7 +293,9 @@ std::optional<std::string> appendPrettyJson(std::string& out, const ValueView& v
 std::optional<std::string> jsonText(const ValueView& value, JsonLayout layout) {
   std::string text;
   if (!Writer<Policy::RoundTrip>(text, layout).write(value)) return std::nullopt;
-  if (layout == JsonLayout::Indented) text += '\n';
+  if (layout == JsonLayout::Indented) {
+    text += '\n';
+  }
   return text;
 }
 

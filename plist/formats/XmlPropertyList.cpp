@@ -19,8 +19,12 @@ namespace {
 using detail::XmlScanner;
 
 std::string_view trimmed(std::string_view text) {
-  while (!text.empty() && detail::isXmlBlank(text.front())) text.remove_prefix(1);
-  while (!text.empty() && detail::isXmlBlank(text.back())) text.remove_suffix(1);
+  while (!text.empty() && detail::isXmlBlank(text.front())) {
+    text.remove_prefix(1);
+  }
+  while (!text.empty() && detail::isXmlBlank(text.back())) {
+    text.remove_suffix(1);
+  }
   return text;
 }
 
@@ -42,7 +46,9 @@ bool takePrefix(std::string_view& text, std::string_view prefix) {
 Value integerValue(std::string_view text) {
   text = trimmed(text);
   const bool isNegative = takePrefix(text, "-");
-  if (!isNegative) takePrefix(text, "+");
+  if (!isNegative) {
+    takePrefix(text, "+");
+  }
   const int base = takePrefix(text, "0x") || takePrefix(text, "0X") ? 16 : 10;
   const auto magnitude = wholeNumber<std::uint64_t>(text, base);
   constexpr auto kMost = static_cast<std::uint64_t>(std::numeric_limits<std::int64_t>::max());
@@ -101,9 +107,7 @@ class XmlReader {
   explicit XmlReader(std::string_view text) : in_(text) {}
 
   PropertyListReading read() {
-    if (!readDocument()) {
-      return {{}, PropertyListFault{PropertyListFault::Place::Line, in_.line(), in_.fault()}};
-    }
+    if (!readDocument()) return {{}, PropertyListFault{PropertyListFault::Place::Line, in_.line(), in_.fault()}};
     return {std::move(value_), {}};
   }
 
@@ -155,10 +159,18 @@ class XmlReader {
     }
     if (tag.name == "string") return in_.readText(tag, text_) && spend(text_.size()) && add(text_);
     Value (*convert)(std::string_view) = nullptr;
-    if (tag.name == "integer") convert = integerValue;
-    if (tag.name == "real") convert = realValue;
-    if (tag.name == "date") convert = dateValue;
-    if (tag.name == "data") convert = [](std::string_view text) { return dataValue(std::string(text)); };
+    if (tag.name == "integer") {
+      convert = integerValue;
+    }
+    if (tag.name == "real") {
+      convert = realValue;
+    }
+    if (tag.name == "date") {
+      convert = dateValue;
+    }
+    if (tag.name == "data") {
+      convert = [](std::string_view text) { return dataValue(std::string(text)); };
+    }
     if (convert == nullptr) return in_.fail("no such element: <" + std::string(tag.name.substr(0, 40)) + ">");
     if (!in_.readText(tag, text_) || !spend(text_.size())) return false;
     const Value value = convert(text_);

@@ -11,7 +11,7 @@
 //
 // Accepted beside that: the value without <plist> around it, comments, processing instructions, CDATA sections,
 // attributes, hexadecimal integers (0x1F), nan and infinities, blanks and line ends inside numbers' and data's
-// elements. A document type is passed over unread, so the only entities are the five that XML knows by itself and those
+// elements. A document type is skipped unread, so the only entities are the five that XML knows by itself and those
 // by number. The text is UTF-8. A key given twice is a fault. Integers go from -2^63 to 2^64-1.
 #pragma once
 

@@ -38,7 +38,9 @@ bool equalsIgnoringCase(std::string_view text, std::string_view lower) {
 }  // namespace
 
 bool XmlScanner::fail(std::string text) {
-  if (fault_.empty()) fault_ = std::move(text);
+  if (fault_.empty()) {
+    fault_ = std::move(text);
+  }
   return false;
 }
 
@@ -48,7 +50,9 @@ std::size_t XmlScanner::line() const {
 }
 
 void XmlScanner::skipBlanks() noexcept {
-  while (at_ < text_.size() && isXmlBlank(text_[at_])) ++at_;
+  while (at_ < text_.size() && isXmlBlank(text_[at_])) {
+    ++at_;
+  }
 }
 
 // Stands at `begin`.
@@ -88,15 +92,21 @@ bool XmlScanner::skipDocumentType() {
       continue;
     }
     ++at_;
-    if (character == '[') ++brackets;
-    if (character == ']' && brackets > 0) --brackets;
+    if (character == '[') {
+      ++brackets;
+    }
+    if (character == ']' && brackets > 0) {
+      --brackets;
+    }
     if (character == '>' && brackets == 0) return true;
   }
   return fail("<!DOCTYPE without its end");
 }
 
 bool XmlScanner::skipProlog() {
-  if (rest().starts_with("\xEF\xBB\xBF")) at_ += 3;
+  if (rest().starts_with("\xEF\xBB\xBF")) {
+    at_ += 3;
+  }
   if (rest().starts_with("<?xml") && !skipDeclaration()) return false;
   if (!skipMisc()) return false;
   if (rest().starts_with("<!DOCTYPE")) return skipDocumentType() && skipMisc();
@@ -121,7 +131,9 @@ bool XmlScanner::readStartTag(Tag& tag) {
   if (atEnd()) return fail("the end comes too early");
   if (text_[at_] != '<') return fail("text where an element is wanted");
   const std::size_t begin = ++at_;
-  while (at_ < text_.size() && isNameCharacter(text_[at_])) ++at_;
+  while (at_ < text_.size() && isNameCharacter(text_[at_])) {
+    ++at_;
+  }
   tag.name = text_.substr(begin, at_ - begin);
   const bool isWhole = atEnd() || isXmlBlank(text_[at_]) || text_[at_] == '/' || text_[at_] == '>';
   if (tag.name.empty() || !isWhole) return fail("a tag that can't be read");
@@ -215,7 +227,9 @@ bool XmlScanner::readCharacter(std::string& text) {
   if (!character || !isXmlCharacter(*character)) return fail("bytes that are no text");
   if (*character == '\r') {
     text += '\n';
-    if (left.starts_with('\n')) left.remove_prefix(1);
+    if (left.starts_with('\n')) {
+      left.remove_prefix(1);
+    }
   } else {
     text.append(rest().substr(0, rest().size() - left.size()));
   }

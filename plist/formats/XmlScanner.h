@@ -1,7 +1,7 @@
 // XmlScanner: the marks of an XML document, one after the other: tags, texts, and what lies between them. It knows no
 // property list. Internal to plist/.
 //
-// Every operation says whether it worked; behind the first fault none does.
+// Every operation says whether it worked; after the first fault none does.
 #pragma once
 
 #include <cstddef>
@@ -26,7 +26,7 @@ class XmlScanner {
   bool skipMisc();
   bool atEnd() const noexcept { return at_ == text_.size(); }
   bool atEndTag() const noexcept { return rest().starts_with("</"); }
-  // <name ...> or <name .../>; attributes are passed over.
+  // <name ...> or <name .../>; attributes are skipped.
   bool readStartTag(Tag& tag);
   // </name>
   bool readEndTag(std::string_view name);

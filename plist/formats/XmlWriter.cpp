@@ -17,9 +17,7 @@ constexpr std::string_view kClosing = "</plist>\n";
 bool isXmlText(std::string_view text) {
   while (!text.empty()) {
     const auto character = takeCharacter(text);
-    if (!character || !isXmlCharacter(*character)) {
-      return false;
-    }
+    if (!character || !isXmlCharacter(*character)) return false;
   }
   return true;
 }
@@ -61,9 +59,7 @@ class XmlWriter {
   void indent(std::size_t depth) { out_.append(depth, '\t'); }
 
   bool element(std::string_view name, std::string_view text) {
-    if (!isXmlText(text)) {
-      return false;
-    }
+    if (!isXmlText(text)) return false;
     out_.append("<").append(name).append(">");
     for (const char character : text) {
       appendEscaped(character);
@@ -93,20 +89,14 @@ class XmlWriter {
 
   static std::string realText(const ValueView& value) {
     const double number = value.asDouble();
-    if (std::isnan(number)) {
-      return "nan";
-    }
-    if (std::isinf(number)) {
-      return number > 0 ? "+infinity" : "-infinity";
-    }
+    if (std::isnan(number)) return "nan";
+    if (std::isinf(number)) return number > 0 ? "+infinity" : "-infinity";
     return description(value);
   }
 
   bool writeDate(Date date) {
     const auto calendar = calendarDate(std::floor(date.epochSeconds));
-    if (!calendar) {
-      return false;
-    }
+    if (!calendar) return false;
     std::string text;
     appendDateAndTime(text, *calendar, 'T');
     text += 'Z';
@@ -127,9 +117,7 @@ class XmlWriter {
     }
     out_ += "<array>\n";
     for (const ValueView item : array) {
-      if (!write(item, depth + 1)) {
-        return false;
-      }
+      if (!write(item, depth + 1)) return false;
     }
     indent(depth);
     out_ += "</array>\n";
@@ -144,9 +132,7 @@ class XmlWriter {
     out_ += "<dict>\n";
     for (const auto& [key, value] : dictionary) {
       indent(depth + 1);
-      if (!element("key", key.text()) || !write(value, depth + 1)) {
-        return false;
-      }
+      if (!element("key", key.text()) || !write(value, depth + 1)) return false;
     }
     indent(depth);
     out_ += "</dict>\n";
@@ -160,9 +146,7 @@ class XmlWriter {
 
 std::optional<std::string> xmlPropertyList(const ValueView& value) {
   std::string xml(kOpening);
-  if (!XmlWriter(xml).write(value, 0)) {
-    return std::nullopt;
-  }
+  if (!XmlWriter(xml).write(value, 0)) return std::nullopt;
   xml += kClosing;
   return xml;
 }

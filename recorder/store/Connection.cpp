@@ -44,16 +44,12 @@ std::optional<std::int64_t> Connection::integer(const char* sql) {
 
 std::optional<std::string> Connection::text(const char* sql) {
   Statement statement;
-  if (statement.prepare(database_, sql) != SQLITE_OK || statement.step() != SQLITE_ROW) {
-    return std::nullopt;
-  }
+  if (statement.prepare(database_, sql) != SQLITE_OK || statement.step() != SQLITE_ROW) return std::nullopt;
   return std::string(statement.text(0));
 }
 
 std::string Connection::errorText() const {
-  if (database_ == nullptr) {
-    return "out of memory";
-  }
+  if (database_ == nullptr) return "out of memory";
   std::string text = sqlite3_errmsg(database_);
   const int systemError = sqlite3_system_errno(database_);
   const int kind = sqlite3_errcode(database_) & 0xFF;

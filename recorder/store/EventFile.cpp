@@ -96,9 +96,13 @@ Outcome EventFile::append(const Row& row) {
 
 Outcome EventFile::expire(std::chrono::steady_clock::time_point deadline) {
   int code = retention_.expire(clock_.epochSeconds(), deadline, expiring_);
-  if (code == SQLITE_OK && expiring_ > 0) code = keepLastId_.bind(1, nextId_ - 1).run();
+  if (code == SQLITE_OK && expiring_ > 0) {
+    code = keepLastId_.bind(1, nextId_ - 1).run();
+  }
   const Outcome outcome = judge(code);
-  if (outcome != Outcome::Done) rollback();
+  if (outcome != Outcome::Done) {
+    rollback();
+  }
   return outcome;
 }
 
@@ -126,7 +130,9 @@ Outcome EventFile::checkpointIfDue() {
   const int code = sqlite3_wal_checkpoint_v2(connection_.handle(), nullptr, SQLITE_CHECKPOINT_PASSIVE, &pages, nullptr);
   // A reader in the way is no fault: the rest is brought in later.
   if ((code & 0xFF) == SQLITE_BUSY) return Outcome::Done;
-  if (code == SQLITE_OK) logPages_ = 0;
+  if (code == SQLITE_OK) {
+    logPages_ = 0;
+  }
   return judge(code);
 }
 

@@ -41,11 +41,21 @@ bool EventFile::readIdentity(Identity& identity) const noexcept {
 
 Outcome EventFile::open() {
   Outcome outcome = checkPath();
-  if (outcome == Outcome::Done) outcome = openConnection();
-  if (outcome == Outcome::Done) outcome = checkContent();
-  if (outcome == Outcome::Done) outcome = checkTables();
-  if (outcome == Outcome::Done) outcome = readLastId();
-  if (outcome == Outcome::Done) outcome = prepareStatements();
+  if (outcome == Outcome::Done) {
+    outcome = openConnection();
+  }
+  if (outcome == Outcome::Done) {
+    outcome = checkContent();
+  }
+  if (outcome == Outcome::Done) {
+    outcome = checkTables();
+  }
+  if (outcome == Outcome::Done) {
+    outcome = readLastId();
+  }
+  if (outcome == Outcome::Done) {
+    outcome = prepareStatements();
+  }
   if (outcome == Outcome::Done) {
     checked_ = opened_;
   } else {
@@ -61,7 +71,9 @@ Outcome EventFile::checkPath() {
     return refuse(Outcome::SetAside, "not a regular file");
   }
   std::error_code ignored;  // when this fails, so does the opening, with a better text
-  if (path_.has_parent_path()) std::filesystem::create_directories(path_.parent_path(), ignored);
+  if (path_.has_parent_path()) {
+    std::filesystem::create_directories(path_.parent_path(), ignored);
+  }
   return Outcome::Done;
 }
 
@@ -97,7 +109,9 @@ Outcome EventFile::checkContent() {
   if (checked_ == opened_) return Outcome::Done;
   Statement check;
   int code = check.prepare(connection_.handle(), "PRAGMA quick_check(1)");
-  if (code == SQLITE_OK) code = check.step();
+  if (code == SQLITE_OK) {
+    code = check.step();
+  }
   if (code != SQLITE_ROW) return judge(code == SQLITE_DONE ? SQLITE_CORRUPT : code);
   const std::string_view verdict = check.text(0);
   if (verdict != "ok") return refuse(Outcome::SetAside, "damaged: " + std::string(verdict));
@@ -109,7 +123,9 @@ Outcome EventFile::checkTables() {
   int code = kinds.prepare(connection_.handle(),
                            "SELECT count(*), count(nullif(type, 'table')) FROM sqlite_schema "
                            "WHERE name IN ('events', 'recorder_state') AND type IN ('table', 'view')");
-  if (code == SQLITE_OK) code = kinds.step();
+  if (code == SQLITE_OK) {
+    code = kinds.step();
+  }
   if (code != SQLITE_ROW) return judge(code);
   const bool hasAny = kinds.integer(0) != 0;
   const bool hasViews = kinds.integer(1) != 0;
@@ -136,7 +152,9 @@ Outcome EventFile::makeTables() {
       std::to_string(lastId_) + "), ('last_id', " + std::to_string(lastId_) + "); COMMIT";
   const int code = connection_.run(sql.c_str());
   const Outcome outcome = judge(code);
-  if (outcome != Outcome::Done) rollback();
+  if (outcome != Outcome::Done) {
+    rollback();
+  }
   return outcome;
 }
 
@@ -145,7 +163,9 @@ Outcome EventFile::readLastId() {
   int code = statement.prepare(connection_.handle(),
                                "SELECT max(coalesce((SELECT max(id) FROM events), 0),"
                                " coalesce((SELECT value FROM recorder_state WHERE name = 'last_id'), 0))");
-  if (code == SQLITE_OK) code = statement.step();
+  if (code == SQLITE_OK) {
+    code = statement.step();
+  }
   if (code != SQLITE_ROW) return judge(code);
   const std::int64_t last = statement.integer(0);
   if (last > kLastSaneId) return refuse(Outcome::SetAside, "its ids leave no room for further ones");
@@ -156,12 +176,18 @@ Outcome EventFile::readLastId() {
 Outcome EventFile::prepareStatements() {
   sqlite3* const database = connection_.handle();
   int code = begin_.prepare(database, "BEGIN IMMEDIATE", true);
-  if (code == SQLITE_OK) code = insert_.prepare(database, "INSERT INTO events VALUES(?1, ?2, ?3, ?4, ?5, ?6)", true);
+  if (code == SQLITE_OK) {
+    code = insert_.prepare(database, "INSERT INTO events VALUES(?1, ?2, ?3, ?4, ?5, ?6)", true);
+  }
   if (code == SQLITE_OK) {
     code = keepLastId_.prepare(database, "INSERT OR REPLACE INTO recorder_state VALUES('last_id', ?1)", true);
   }
-  if (code == SQLITE_OK) code = commit_.prepare(database, "COMMIT", true);
-  if (code == SQLITE_OK) code = retention_.prepare(connection_);
+  if (code == SQLITE_OK) {
+    code = commit_.prepare(database, "COMMIT", true);
+  }
+  if (code == SQLITE_OK) {
+    code = retention_.prepare(connection_);
+  }
   return judge(code);
 }
 

@@ -14,8 +14,6 @@
 
 namespace tarn::recorder {
 
-using platform::MaybeError;
-
 namespace {
 
 constexpr int kBusyMilliseconds = 2000;
@@ -106,18 +104,14 @@ bool EventReader::sameFile(const Identity& now) const noexcept {
   return now.there == opened_.there && now.device == opened_.device && now.inode == opened_.inode;
 }
 
-MaybeError EventReader::openAs(const std::string& name) {
-  if (connection_.open(name, SQLITE_OPEN_READONLY | SQLITE_OPEN_URI) != SQLITE_OK) {
-    return lastError();
-  }
+tarn::Status EventReader::openAs(const std::string& name) {
+  if (connection_.open(name, SQLITE_OPEN_READONLY | SQLITE_OPEN_URI) != SQLITE_OK) return lastError();
   sqlite3_busy_timeout(connection_.handle(), kBusyMilliseconds);
   distrust(connection_.handle(), stepsLeft_);
   sqlite3_create_function_v2(connection_.handle(), "matches_glob", 2, SQLITE_UTF8 | SQLITE_DETERMINISTIC, nullptr,
                              matchesGlob, nullptr, nullptr, nullptr);
   // Only the first reading access shows whether the log and its index can be used.
-  if (!connection_.integer("SELECT count(*) FROM sqlite_schema")) {
-    return lastError();
-  }
+  if (!connection_.integer("SELECT count(*) FROM sqlite_schema")) return lastError();
   return {};
 }
 
@@ -132,24 +126,24 @@ void EventReader::setBounds() {
   textLeft_ = kTextOfSmallFile + kTextPerByte * bytes;
 }
 
-platform::PlatformError EventReader::lastError() const {
+Error EventReader::lastError() const {
   return {sqlite3_errcode(connection_.handle()),
           stepsLeft_ < 0 ? "its tables lead into themselves" : connection_.errorText()};
 }
 
-MaybeError EventReader::open() {
+tarn::Status EventReader::open() {
   opened_ = identity();
   asItLies_ = false;
   dataVersion_ = -1;
-  MaybeError error = openAs(file_.string());
-  if (!error) return {};
+  tarn::Status error = openAs(file_.string());
+  if (error.ok()) return {};
   const auto code = error->code & 0xFF;
   // No index can be made in a directory that can't be written to. Where there is no log either, nobody writes, and the
   // file alone is all there is.
   if ((code == SQLITE_CANTOPEN || code == SQLITE_READONLY) && !opened_.hasLog) {
     asItLies_ = true;
     error = openAs(uriOf(file_.string()));
-    if (!error) return {};
+    if (error.ok()) return {};
   }
   connection_.close();
   return error;
@@ -159,16 +153,22 @@ EventReader::Result EventReader::read(const EventQuery& query) {
   const Identity now = identity();
   if (!now.there) {
     connection_.close();
-    if (lastRead_) lastRead_ = Identity();  // whatever comes next is another file, even where it gets the same number
+    if (lastRead_) {
+      lastRead_ = Identity();
+    }  // whatever comes next is another file, even where it gets the same number
     return missing("there is no file " + file_.string());
   }
-  if (connection_.isOpen() && !sameFile(now)) connection_.close();
+  if (connection_.isOpen() && !sameFile(now)) {
+    connection_.close();
+  }
   setBounds();
   if (!connection_.isOpen()) {
-    if (const auto error = open()) return failed(file_.string() + ": " + error->text);
+    if (const auto error = open(); error.failed()) return failed(file_.string() + ": " + error->text);
   }
   Result result = readOpen(query);
-  if (result.status == Status::Failed) connection_.close();
+  if (result.status == Status::Failed) {
+    connection_.close();
+  }
   return result;
 }
 
@@ -193,35 +193,39 @@ EventReader::Result EventReader::readOpen(const EventQuery& query) {
   after = startingPoint(after);
   const auto error = readRows(query, after, result);
   static_cast<void>(connection_.run("ROLLBACK"));
-  if (error) return failed(file_.string() + ": " + error->text);
+  if (error.failed()) return failed(file_.string() + ": " + error->text);
   lastRead_ = opened_;
   return result;
 }
 
-MaybeError EventReader::readRows(const EventQuery& query, std::int64_t after, Result& result) {
+tarn::Status EventReader::readRows(const EventQuery& query, std::int64_t after, Result& result) {
   std::string sql = "SELECT id, time, backend, name, payload, detail FROM events WHERE id > ?1";
-  if (query.backend) sql += " AND backend = ?2";
-  if (query.nameGlob) sql += " AND matches_glob(?3, name)";
+  if (query.backend) {
+    sql += " AND backend = ?2";
+  }
+  if (query.nameGlob) {
+    sql += " AND matches_glob(?3, name)";
+  }
   sql += " ORDER BY id LIMIT ?4";
   Statement rows;
-  if (rows.prepare(connection_.handle(), sql) != SQLITE_OK) {
-    return lastError();
-  }
+  if (rows.prepare(connection_.handle(), sql) != SQLITE_OK) return lastError();
   rows.bind(1, after).bind(4, static_cast<std::int64_t>(query.limit));
-  if (query.backend) rows.bind(2, std::string_view(*query.backend));
-  if (query.nameGlob) rows.bind(3, std::string_view(*query.nameGlob));
+  if (query.backend) {
+    rows.bind(2, std::string_view(*query.backend));
+  }
+  if (query.nameGlob) {
+    rows.bind(3, std::string_view(*query.nameGlob));
+  }
   int code = rows.step();
   for (; code == SQLITE_ROW; code = rows.step()) {
-    for (int column = 2; column < 6; ++column) textLeft_ -= static_cast<std::int64_t>(rows.text(column).size());
-    if (textLeft_ < 0) {
-      return platform::PlatformError{SQLITE_CORRUPT, "its rows say more than it holds"};
+    for (int column = 2; column < 6; ++column) {
+      textLeft_ -= static_cast<std::int64_t>(rows.text(column).size());
     }
+    if (textLeft_ < 0) return Error{SQLITE_CORRUPT, "its rows say more than it holds"};
     result.rows.push_back({rows.integer(0), rows.real(1), std::string(rows.text(2)), std::string(rows.text(3)),
                            std::string(rows.text(4)), std::string(rows.text(5))});
   }
-  if (code != SQLITE_DONE) {
-    return lastError();
-  }
+  if (code != SQLITE_DONE) return lastError();
   result.more = result.rows.size() == query.limit;
   const std::int64_t last = connection_.integer("SELECT max(id) FROM events").value_or(after);
   result.lookedUpTo = result.more && !result.rows.empty() ? result.rows.back().id : std::max(after, last);

@@ -14,7 +14,7 @@
 #include <string>
 #include <vector>
 
-#include "platform/Outcome.h"
+#include "plist/Result.h"
 #include "recorder/store/Connection.h"
 
 namespace tarn::recorder {
@@ -49,7 +49,7 @@ class EventReader {
     // file was replaced by one whose ids begin anew; its rows are then in this result.
     std::int64_t lookedUpTo = 0;
     bool more = false;  // the limit cut the result short
-    std::string error;  // when not Ok
+    std::string error;  // when not Ok; names the file
   };
 
   explicit EventReader(std::filesystem::path file);
@@ -74,13 +74,13 @@ class EventReader {
   Identity identity() const;
   bool sameFile(const Identity& now) const noexcept;
   bool changed();
-  [[nodiscard]] platform::MaybeError open();
-  [[nodiscard]] platform::MaybeError openAs(const std::string& name);
+  [[nodiscard]] tarn::Status open();
+  [[nodiscard]] tarn::Status openAs(const std::string& name);
   void setBounds();  // of the read that begins
-  platform::PlatformError lastError() const;
+  Error lastError() const;
   std::int64_t startingPoint(std::int64_t after);
   Result readOpen(const EventQuery& query);
-  [[nodiscard]] platform::MaybeError readRows(const EventQuery& query, std::int64_t after, Result& result);
+  [[nodiscard]] tarn::Status readRows(const EventQuery& query, std::int64_t after, Result& result);
 
   const std::filesystem::path file_;
   Connection connection_;

@@ -37,17 +37,23 @@ struct SetMatch {
 SetMatch matchSet(std::string_view pattern, std::size_t at, std::string_view character) noexcept {
   std::size_t next = at + 1;
   const bool negated = next < pattern.size() && (pattern[next] == '!' || pattern[next] == '^');
-  if (negated) ++next;
+  if (negated) {
+    ++next;
+  }
   bool found = false;
   for (bool first = true; next < pattern.size(); first = false) {
     if (pattern[next] == ']' && !first) return {next + 1, found != negated};
-    if (pattern[next] == '\\' && next + 1 < pattern.size()) ++next;
+    if (pattern[next] == '\\' && next + 1 < pattern.size()) {
+      ++next;
+    }
     const std::string_view low = characterAt(pattern, next);
     next += low.size();
     std::string_view high = low;
     if (next + 1 < pattern.size() && pattern[next] == '-' && pattern[next + 1] != ']') {
       ++next;
-      if (pattern[next] == '\\' && next + 1 < pattern.size()) ++next;
+      if (pattern[next] == '\\' && next + 1 < pattern.size()) {
+        ++next;
+      }
       high = characterAt(pattern, next);
       next += high.size();
     }
@@ -64,7 +70,9 @@ std::size_t matchOne(std::string_view pattern, std::size_t at, std::string_view 
     const SetMatch set = matchSet(pattern, at, character);
     if (set.end != kNone) return set.matches ? set.end : kNone;
   }
-  if (pattern[at] == '\\' && at + 1 < pattern.size()) ++at;
+  if (pattern[at] == '\\' && at + 1 < pattern.size()) {
+    ++at;
+  }
   const std::string_view wanted = characterAt(pattern, at);
   return wanted == character ? at + wanted.size() : kNone;
 }
@@ -95,7 +103,9 @@ bool globMatches(std::string_view pattern, std::string_view name) noexcept {
       return false;
     }
   }
-  while (inPattern < pattern.size() && pattern[inPattern] == '*') ++inPattern;
+  while (inPattern < pattern.size() && pattern[inPattern] == '*') {
+    ++inPattern;
+  }
   return inPattern == pattern.size();
 }
 

@@ -20,9 +20,15 @@ int Retention::prepare(Connection& connection) {
   connection_ = &connection;
   sqlite3* const database = connection.handle();
   int code = oldest_.prepare(database, "SELECT id, time FROM events ORDER BY id LIMIT 1", true);
-  if (code == SQLITE_OK) code = pageCount_.prepare(database, "PRAGMA page_count", true);
-  if (code == SQLITE_OK) code = freePages_.prepare(database, "PRAGMA freelist_count", true);
-  if (code == SQLITE_OK) code = removeBefore_.prepare(database, "DELETE FROM events WHERE id < ?1", true);
+  if (code == SQLITE_OK) {
+    code = pageCount_.prepare(database, "PRAGMA page_count", true);
+  }
+  if (code == SQLITE_OK) {
+    code = freePages_.prepare(database, "PRAGMA freelist_count", true);
+  }
+  if (code == SQLITE_OK) {
+    code = removeBefore_.prepare(database, "DELETE FROM events WHERE id < ?1", true);
+  }
   if (code == SQLITE_OK) {
     code = removeAgedBefore_.prepare(database, "DELETE FROM events WHERE id < ?1 AND time < ?2", true);
   }
@@ -51,7 +57,9 @@ int Retention::readOldest(std::int64_t& id, double& time, bool& any) {
 
 int Retention::readPragma(Statement& pragma, std::int64_t& value) {
   const int code = pragma.step();
-  if (code == SQLITE_ROW) value = pragma.integer(0);
+  if (code == SQLITE_ROW) {
+    value = pragma.integer(0);
+  }
   pragma.reset();
   return code == SQLITE_ROW ? SQLITE_OK : code;
 }
@@ -60,7 +68,9 @@ int Retention::readSizes(std::int64_t& fileBytes, std::int64_t& usedBytes) {
   std::int64_t pages = 0;
   std::int64_t freePages = 0;
   int code = readPragma(pageCount_, pages);
-  if (code == SQLITE_OK) code = readPragma(freePages_, freePages);
+  if (code == SQLITE_OK) {
+    code = readPragma(freePages_, freePages);
+  }
   fileBytes = pages * pageBytes_;
   usedBytes = (pages - freePages) * pageBytes_;
   return code;
@@ -74,7 +84,9 @@ int Retention::removeSlice(double now, bool& removedAny, std::uint64_t& removed)
   double oldestTime = 0;
   bool any = false;
   int code = readSizes(fileBytes, usedBytes);
-  if (code == SQLITE_OK) code = readOldest(oldestId, oldestTime, any);
+  if (code == SQLITE_OK) {
+    code = readOldest(oldestId, oldestTime, any);
+  }
   if (code != SQLITE_OK || !any) return code;
 
   const double cutoff = now - limits_.maxAgeSeconds;
@@ -116,7 +128,9 @@ int Retention::expire(double now, std::chrono::steady_clock::time_point deadline
   int code = SQLITE_OK;
   do {
     code = removeSlice(now, more, removed);
-    if (code == SQLITE_OK && !more) code = giveBackPages(more);
+    if (code == SQLITE_OK && !more) {
+      code = giveBackPages(more);
+    }
   } while (code == SQLITE_OK && more && std::chrono::steady_clock::now() < deadline);
   hasMore_ = code == SQLITE_OK && more;
   return code;

@@ -14,9 +14,7 @@ std::optional<std::string> DataSerialize::getPlistBlob(const plist::ValueView& v
 std::optional<std::string> DataSerialize::getXMLInfo(const plist::ValueView& value) {
   auto xml = getPlistBlob(value);
   const auto isAscii = [](char character) { return (static_cast<unsigned char>(character) & 0x80U) == 0; };
-  if (xml && !std::all_of(xml->begin(), xml->end(), isAscii)) {
-    return std::nullopt;
-  }
+  if (xml && !std::all_of(xml->begin(), xml->end(), isAscii)) return std::nullopt;
   return xml;
 }
 
@@ -26,9 +24,7 @@ std::optional<std::string> DataSerialize::getDataXMLInfo(const plist::ValueView&
 
 std::optional<std::string> DataSerialize::getBase64XMLBlob(const plist::ValueView& value) {
   const auto xml = getPlistBlob(value);
-  if (!xml) {
-    return std::nullopt;
-  }
+  if (!xml) return std::nullopt;
   std::string base64;
   plist::appendBase64(base64, *xml);
   return base64;

@@ -68,21 +68,17 @@ void ProcessState::clear() {
 }
 
 std::shared_ptr<void> ProcessState::find(const void* tag, std::shared_ptr<void> (*make)()) {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   const auto found =
       std::find_if(entries_.begin(), entries_.end(), [tag](const Entry& entry) { return entry.tag == tag; });
-  if (found != entries_.end()) {
-    return found->state;
-  }
+  if (found != entries_.end()) return found->state;
   entries_.push_back({tag, make()});
   return entries_.back().state;
 }
 
 std::shared_ptr<void> ProcessState::takeLast() {
-  const platform::MutexLock lock(mutex_);
-  if (entries_.empty()) {
-    return nullptr;
-  }
+  const MutexLock lock(mutex_);
+  if (entries_.empty()) return nullptr;
   std::shared_ptr<void> last = std::move(entries_.back().state);
   entries_.pop_back();
   return last;

@@ -17,7 +17,7 @@
 #include <mutex>
 #include <vector>
 
-#include "platform/ThreadSafety.h"
+#include "plist/ThreadSafety.h"
 
 namespace tarn {
 
@@ -41,7 +41,7 @@ class ProcessState {
         current().find(&kTag<T>, []() -> std::shared_ptr<void> { return std::make_shared<T>(); }));
   }
 
-  // Lets go of everything below and of the states. The installation calls it while it still stands.
+  // Drops everything below and the states. The installation calls it while it still stands.
   void clear();
 
   const platform::Facilities& facilities;
@@ -64,7 +64,7 @@ class ProcessState {
   std::shared_ptr<void> find(const void* tag, std::shared_ptr<void> (*make)());
   std::shared_ptr<void> takeLast();
 
-  platform::Mutex mutex_;
+  Mutex mutex_;
   std::vector<Entry> entries_ TARN_GUARDED_BY(mutex_);  // in the order in which they were made
 };
 

@@ -59,9 +59,7 @@ void appendFormatted(std::string& out, std::string_view format, std::initializer
     const std::size_t percent = std::min(format.find('%'), format.size());
     out.append(format.substr(0, percent));
     format.remove_prefix(percent);
-    if (format.empty()) {
-      return;
-    }
+    if (format.empty()) return;
     format.remove_prefix(1);
     if (format.starts_with('%')) {
       out.push_back('%');
@@ -76,9 +74,7 @@ void appendFormatted(std::string& out, std::string_view format, std::initializer
 }
 
 void shorten(std::string& line) {
-  if (line.size() <= kTarnReportingMostLogBytes) {
-    return;
-  }
+  if (line.size() <= kTarnReportingMostLogBytes) return;
   std::size_t end = kTarnReportingMostLogBytes;
   while ((static_cast<unsigned char>(line[end]) & 0xC0U) == 0x80U) {  // not inside a character
     --end;

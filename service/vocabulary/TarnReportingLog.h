@@ -6,7 +6,7 @@
 //
 // A conversion in the text (%@, %s, %i, %d, %u, %ld, %lu, %lli, %lld, %llu, %f, %x) takes the next argument and prints
 // it by the argument's own type, so a wrong letter can't read wrong memory: integers in decimal (%x: hexadecimal), a
-// double as %f says with six decimals, or as its text form behind %@, texts as they are, property-list values by their
+// double as %f says with six decimals, or as its text form with %@, texts as they are, property-list values by their
 // text form. "%%" is one percent sign. An argument may be a callable: it is called only when the line is written, so a
 // dear description costs nothing while its level is off.
 //

@@ -2,7 +2,7 @@
 //
 //   const TarnReportingSignpost signpost(SignpostCategory::Worker, workerClass.name, "start");
 //
-// The interval begins here and ends with the scope. Subject, verb and the argument's name must live for ever (see
+// The interval begins here and ends with the scope. Subject, verb and the argument's name must be static (see
 // platform/Signposts.h). While nothing records, setting one is a load and a branch that the processor foresees, and its
 // end is a look at what the begin left in a register. Threads: any.
 #pragma once

@@ -27,9 +27,7 @@ constexpr std::string_view kServerQueueName = "sys.oxbow.tarnkit.reporting.serve
 // Rounds to the nearest whole number, held to the range of 32 bits.
 std::int32_t roundedToInt32(double value) {
   const double rounded = std::round(value);
-  if (std::isnan(rounded)) {
-    return 0;
-  }
+  if (std::isnan(rounded)) return 0;
   return static_cast<std::int32_t>(std::clamp(rounded, double{std::numeric_limits<std::int32_t>::min()},
                                               double{std::numeric_limits<std::int32_t>::max()}));
 }
@@ -53,9 +51,7 @@ std::string plainDecimal(double value) {
 // Adds one to the last digit of a decimal number, carrying as far as it goes.
 void incrementLastDigit(std::string& digits) {
   for (std::size_t at = digits.size(); at-- > 0;) {
-    if (digits[at] == '.') {
-      continue;
-    }
+    if (digits[at] == '.') continue;
     if (digits[at] != '9') {
       ++digits[at];
       return;
@@ -70,9 +66,7 @@ void incrementLastDigit(std::string& digits) {
 void roundDecimals(std::string& digits, std::size_t places) {
   const std::size_t point = digits.find('.');
   const std::size_t keep = places == 0 ? point : point + 1 + places;
-  if (point == std::string::npos || keep >= digits.size()) {
-    return;
-  }
+  if (point == std::string::npos || keep >= digits.size()) return;
   const std::string dropped = digits.substr(places == 0 ? point + 1 : keep);
   digits.resize(keep);
   const bool isHalf = dropped == "5";             // the shortest digits end in no zeros
@@ -84,13 +78,9 @@ void roundDecimals(std::string& digits, std::size_t places) {
 
 // A number with at most `most` decimals and at least `least`, without grouping.
 std::string formatDecimal(double value, std::size_t least, std::size_t most) {
-  if (std::isnan(value)) {
-    return "NaN";
-  }
+  if (std::isnan(value)) return "NaN";
   std::string text = std::signbit(value) ? "-" : "";
-  if (std::isinf(value)) {
-    return text + "\u221E";
-  }
+  if (std::isinf(value)) return text + "\u221E";
   std::string digits = plainDecimal(std::abs(value));
   roundDecimals(digits, most);
   std::size_t point = digits.find('.');
@@ -111,7 +101,7 @@ std::string formatDecimal(double value, std::size_t least, std::size_t most) {
 bool TarnReportingUtilityWait(platform::Condition& condition, double timeoutSeconds, const bool& flag,
                               std::string_view waitingText, std::string_view timeoutText,
                               const platform::LogCategory& logCategory) {
-  const std::lock_guard lock(condition);
+  const MutexLock lock(condition);
   while (!flag) {
     TarnReportingLog(logCategory, LogLevel::Info, kModule, "%@", waitingText);
     if (!condition.waitFor(std::chrono::duration<double>(timeoutSeconds))) {
@@ -126,17 +116,15 @@ bool TarnReportingUtilityWait(platform::Condition& condition, double timeoutSeco
 bool TarnReportingUtilityWait(platform::Condition& condition, std::chrono::nanoseconds timeout, const bool& flag) {
   const platform::Clock& clock = TarnReportingFacilities().clock;
   const auto deadline = clock.monotonic() + timeout;
-  const std::lock_guard lock(condition);
+  const MutexLock lock(condition);
   for (auto left = timeout; !flag && left > std::chrono::nanoseconds::zero(); left = deadline - clock.monotonic()) {
-    if (!condition.waitFor(left)) {
-      break;
-    }
+    if (!condition.waitFor(left)) break;
   }
   return flag;
 }
 
 void TarnReportingUtilitySignal(platform::Condition& condition, bool& flag) {
-  const std::lock_guard lock(condition);
+  const MutexLock lock(condition);
   flag = true;
   condition.signal();
 }
@@ -173,14 +161,10 @@ double TarnReportingUtilityRoundWithPlaces(double value, std::int32_t places) {
 
 std::optional<std::string> TarnReportingUtilityBucketNumberToString(double number, std::span<const double> buckets,
                                                                     std::int32_t places) {
-  if (buckets.empty()) {
-    return std::nullopt;
-  }
+  if (buckets.empty()) return std::nullopt;
   double best = buckets.front();
   for (const double bucket : buckets) {
-    if (std::abs(number - bucket) > std::abs(number - best)) {
-      break;
-    }
+    if (std::abs(number - bucket) > std::abs(number - best)) break;
     best = bucket;
   }
   const std::size_t least = places == 0 ? 0 : 1;
@@ -191,9 +175,7 @@ std::optional<std::string> TarnReportingUtilityBucketNumberToString(double numbe
 
 bool TarnReportingUtilityKeyIsPresentAndHasChanged(const plist::Key& key, const plist::Dictionary* first,
                                                    const plist::Dictionary* second) {
-  if (first == nullptr || second == nullptr) {
-    return false;
-  }
+  if (first == nullptr || second == nullptr) return false;
   const plist::ValueView before = first->get(key);
   const plist::ValueView after = second->get(key);
   return before.present() && after.present() && !(before == after);

@@ -21,7 +21,7 @@ struct LogCategory;
 }  // namespace platform
 
 // Waits until `flag` is set, for at most `timeoutSeconds` a wait: a wake-up that finds the flag unset waits the whole
-// time anew. Logs `waitingText` (info) before each wait and `timeoutText` (error) when the time is up. Returns whether
+// time again. Logs `waitingText` (info) before each wait and `timeoutText` (error) when the time is up. Returns whether
 // the flag was set. For the server queue, which it blocks.
 bool TarnReportingUtilityWait(platform::Condition& condition, double timeoutSeconds, const bool& flag,
                               std::string_view waitingText, std::string_view timeoutText,

@@ -112,9 +112,7 @@ AudioEventCategory TarnReportingUtilityCategoryFromString(std::string_view strin
 }
 
 std::string_view TarnReportingUtilityTypeString(AudioEventType type) {
-  if (type == AudioEventType::Unknown) {
-    return "Unknown";
-  }
+  if (type == AudioEventType::Unknown) return "Unknown";
   const auto index = static_cast<std::size_t>(type);
   return kTypeNames[index < kTypeNames.size() ? index : 0];
 }
@@ -131,9 +129,7 @@ std::string_view TarnReportingUtilityGenerateServiceNameFromServiceType(AudioSer
 
 AudioServiceType TarnReportingUtilityGenerateServiceTypeFromServiceName(std::string_view name) {
   for (std::size_t index = 0; index < kServiceNames.size(); ++index) {
-    if (kServiceNames[index] == name) {
-      return static_cast<AudioServiceType>(index);
-    }
+    if (kServiceNames[index] == name) return static_cast<AudioServiceType>(index);
   }
   return AudioServiceType::Unknown;
 }

@@ -87,12 +87,12 @@ std::string TarnReportingUtilityCategoryString(AudioEventCategory category);
 // Unknown, although the printer writes them.
 AudioEventCategory TarnReportingUtilityCategoryFromString(std::string_view string);
 
-// "Generic" for every value without a name of its own, "Unknown" for 65535. The text lives for ever.
+// "Generic" for every value without a name of its own, "Unknown" for 65535. The text is static.
 std::string_view TarnReportingUtilityTypeString(AudioEventType type);
 // Generic for every text that is not known; "MemoryLog" is not known here.
 AudioEventType TarnReportingUtilityTypeFromString(std::string_view string);
 
-// "unknown" for every value without a name. The text lives for ever.
+// "unknown" for every value without a name. The text is static.
 std::string_view TarnReportingUtilityGenerateServiceNameFromServiceType(AudioServiceType serviceType);
 AudioServiceType TarnReportingUtilityGenerateServiceTypeFromServiceName(std::string_view name);
 

@@ -22,11 +22,9 @@ BTAccess::BTAccess(platform::AccessoryQueries* queries) : registrationInfo_(begi
   baseUnit_.setRegistrationInfoParams(registrationInfo_);
 }
 
-platform::Outcome<plist::Dictionary> BTAccess::gatherData() {
+Result<plist::Dictionary> BTAccess::gatherData() {
   registrationInfo_->clear();
-  if (platform::MaybeError error = baseUnit_.enumerateBluetoothDevices()) {
-    return {{}, std::move(error)};
-  }
+  if (Status error = baseUnit_.enumerateBluetoothDevices(); error.failed()) return {{}, std::move(error)};
   const std::uint16_t count = baseUnit_.getDeviceCount();
   for (std::uint16_t i = 0; i < count; ++i) {
     baseUnit_.loadParams(platform::AccessoryPart::Left, i);

@@ -5,8 +5,8 @@
 
 #include <memory>
 
-#include "platform/Outcome.h"
 #include "plist/Dictionary.h"
+#include "plist/Result.h"
 #include "telemetry/registration/BaseUnit.h"
 
 namespace tarn {
@@ -17,7 +17,7 @@ class BTAccess {
   explicit BTAccess(platform::AccessoryQueries* queries);
 
   // The registration info of the accessories that are found now. An enumeration that fails leaves no info.
-  platform::Outcome<plist::Dictionary> gatherData();
+  Result<plist::Dictionary> gatherData();
 
  private:
   std::shared_ptr<plist::Dictionary> registrationInfo_;

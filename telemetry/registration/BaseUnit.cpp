@@ -32,13 +32,11 @@ BaseUnit::BaseUnit(platform::AccessoryQueries* queries) : queries_(queries) {
   kLog(LogLevel::Debug, "BaseUnit initialize");
 }
 
-platform::MaybeError BaseUnit::enumerateBluetoothDevices() {
+Status BaseUnit::enumerateBluetoothDevices() {
   kLog(LogLevel::Default, "Enumerate Bluetooth!");
   records_.clear();
-  if (queries_ == nullptr) {
-    return {};
-  }
-  platform::Outcome<std::uint16_t> found = queries_->enumerate();
+  if (queries_ == nullptr) return {};
+  Result<std::uint16_t> found = queries_->enumerate();
   deviceCount_ = found.value;
   return std::move(found.error);
 }
@@ -48,13 +46,9 @@ bool BaseUnit::isDeviceWithCase(std::uint16_t accessoryIndex) const {
 }
 
 void BaseUnit::loadParams(platform::AccessoryPart part, std::uint16_t accessoryIndex) {
-  if (queries_ == nullptr || accessoryIndex >= deviceCount_) {
-    return;
-  }
+  if (queries_ == nullptr || accessoryIndex >= deviceCount_) return;
   plist::Dictionary params = queries_->parameters(part, accessoryIndex);
-  if (params.empty()) {
-    return;
-  }
+  if (params.empty()) return;
   if (records_.size() <= accessoryIndex) {
     records_.resize(std::size_t{accessoryIndex} + 1);
   }

@@ -11,8 +11,8 @@
 #include <vector>
 
 #include "platform/AccessoryQueries.h"
-#include "platform/Outcome.h"
 #include "plist/Dictionary.h"
+#include "plist/Result.h"
 
 namespace tarn {
 
@@ -21,8 +21,8 @@ class BaseUnit {
   // `queries` may be null; it outlives this.
   explicit BaseUnit(platform::AccessoryQueries* queries);
 
-  // Looks for accessories anew, and logs that it does.
-  platform::MaybeError enumerateBluetoothDevices();
+  // Looks for accessories again, and logs that it does.
+  Status enumerateBluetoothDevices();
   // How many the last enumeration found.
   std::uint16_t getDeviceCount() const noexcept { return deviceCount_; }
   bool isDeviceWithCase(std::uint16_t accessoryIndex) const;

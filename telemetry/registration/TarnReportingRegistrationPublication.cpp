@@ -58,9 +58,7 @@ void TarnReportingRegistrationPublication::begin(const TarnReportingSession& ses
                                                  const std::string& hierarchyToken) {
   rtcReportingSession_ = TarnReportingFacilities().rtcReporting->createSession(sessionInfoOf(session, hierarchyToken),
                                                                                userInfoOf(session), std::nullopt);
-  if (!rtcReportingSession_) {
-    return;
-  }
+  if (!rtcReportingSession_) return;
   rtcReportingSession_->startConfiguration(
       [self = shared_from_this()](const std::optional<std::vector<std::string>>& backends) {
         self->started_ = backends.has_value();
@@ -81,14 +79,12 @@ void TarnReportingRegistrationPublication::sendRecords() {
 
 // NOLINTNEXTLINE(readability-identifier-naming): its given name
 void TarnReportingRegistrationPublication::_sendMessage(const TarnReportingSessionMessage& message) {
-  if (!rtcReportingSession_) {
-    return;
-  }
+  if (!rtcReportingSession_) return;
   const platform::RtcReportingSession::SendResult result =
       rtcReportingSession_->sendMessage(retrieveRTCReportingCategoryFromCategory(message.category()),
                                         static_cast<std::uint16_t>(message.type()), message.message());
   if (!result.sent) {
-    if (result.error) {
+    if (result.error.failed()) {
       kLog(LogLevel::Error, "error sending message %@", result.error->text);
     }
     return;

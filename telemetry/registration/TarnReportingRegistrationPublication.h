@@ -37,7 +37,7 @@ class TarnReportingRegistrationPublication : public std::enable_shared_from_this
   // Whether backends were found.
   bool started() const noexcept { return started_; }
   // Sends one message as it is. One that is refused with an error is logged; one that is sent puts the next publication
-  // off by a week. Behind begin(); without a back-end session nothing is sent.
+  // off by a week. After begin(); without a back-end session nothing is sent.
   void _sendMessage(
       const TarnReportingSessionMessage& message);  // NOLINT(readability-identifier-naming): its given name
   // The category proper, without its domain.

@@ -35,11 +35,11 @@ std::shared_ptr<TarnReportingRegistrationState> TarnReportingRegistrationState::
   return ProcessState::of<TarnReportingRegistrationState>();
 }
 
-platform::MaybeError TarnReportingRegistrationState::enumerate() {
+Status TarnReportingRegistrationState::enumerate() {
   if (!accessoryReader_) {
     accessoryReader_ = std::make_unique<BTAccess>(TarnReportingFacilities().accessories);
   }
-  platform::Outcome<plist::Dictionary> gathered = accessoryReader_->gatherData();
+  Result<plist::Dictionary> gathered = accessoryReader_->gatherData();
   if (!gathered.failed()) {
     registrationInfo_ = std::move(gathered.value);
   }

@@ -13,8 +13,8 @@
 #include <optional>
 #include <string_view>
 
-#include "platform/Outcome.h"
 #include "plist/Dictionary.h"
+#include "plist/Result.h"
 #include "telemetry/registration/BTAccess.h"
 
 namespace tarn {
@@ -28,7 +28,7 @@ class TarnReportingRegistrationState {
   const std::optional<plist::Dictionary>& registrationInfo() const noexcept { return registrationInfo_; }
   // Enumerates with the accessory reader, which is made by the first call. What it finds becomes the info, and is
   // stored; the error of an enumeration that failed leaves the info as it was.
-  platform::MaybeError enumerate();
+  Status enumerate();
   void storeRegistrationInfo() const;
 
   // Epoch seconds; 0 when it was never set. Loaded on first use.

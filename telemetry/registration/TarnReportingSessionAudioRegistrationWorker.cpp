@@ -61,9 +61,7 @@ void TarnReportingSessionAudioRegistrationWorker::handleMessage(
     const std::shared_ptr<TarnReportingSessionMessage>& message) {
   static const plist::Key kActiveDevices("active_devices");
   const plist::ValueView devices = message->message().get(kActiveDevices);
-  if (devices.asText().find(kDeviceSignature) == std::string::npos) {
-    return;
-  }
+  if (devices.asText().find(kDeviceSignature) == std::string::npos) return;
   const double now = currentEpoch();
   if (state_->enumerationCheckEpoch() == 0) {
     state_->setEnumerationCheckEpoch(now);
@@ -76,7 +74,7 @@ void TarnReportingSessionAudioRegistrationWorker::handleMessage(
 }
 
 void TarnReportingSessionAudioRegistrationWorker::enumerate() {
-  if (const platform::MaybeError error = state_->enumerate()) {
+  if (const Status error = state_->enumerate(); error.failed()) {
     kLog(LogLevel::Debug, "Exception in BT gatherData : %@", error->text);
     state_->scheduleEnumerationCheck(currentEpoch() + kDaySeconds);
     return;
@@ -124,13 +122,9 @@ void TarnReportingSessionAudioRegistrationWorker::publish(double now) {
 std::vector<plist::Dictionary> TarnReportingSessionAudioRegistrationWorker::recentRecords(double now) const {
   std::vector<plist::Dictionary> records;
   const plist::ValueView splunk = state_->registrationInfo()->get(registration::kSplunk);
-  if (splunk.kind() != plist::Kind::Array) {
-    return records;
-  }
+  if (splunk.kind() != plist::Kind::Array) return records;
   for (const plist::ValueView entry : splunk.array()) {
-    if (entry.kind() != plist::Kind::Dictionary) {
-      continue;
-    }
+    if (entry.kind() != plist::Kind::Dictionary) continue;
     plist::Dictionary record = entry.dictionary();
     const plist::Value epoch = record.get(registration::kLastConnectedEpoch);
     record.remove(registration::kLastConnectedEpoch);
@@ -145,9 +139,7 @@ std::vector<plist::Dictionary> TarnReportingSessionAudioRegistrationWorker::rece
 void TarnReportingSessionAudioRegistrationWorker::setupRTCReporterInterface(std::vector<plist::Dictionary> records) {
   constexpr std::string_view kOperation = "setupRTCReporterInterface";
   const std::shared_ptr<TarnReportingSession> owner = session();
-  if (!owner) {
-    return;
-  }
+  if (!owner) return;
   kLog(LogLevel::Debug, "entering rtcreporting %s", kOperation);
   platform::RtcReportingService* const service = TarnReportingFacilities().rtcReporting;
   const std::optional<std::string> token = service == nullptr ? std::nullopt : service->newHierarchyToken(std::nullopt);

@@ -5,7 +5,7 @@
 namespace tarn {
 
 void TarnReportingQueueSemaphore::signal() {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   ++count_;
   if (waiter_) {
     waiter_->resume();
@@ -15,7 +15,7 @@ void TarnReportingQueueSemaphore::signal() {
 void TarnReportingQueueSemaphore::wait(const std::shared_ptr<platform::SuspendableQueue>& queue,
                                        std::chrono::nanoseconds longest, Then then) {
   {
-    const std::lock_guard lock(mutex_);
+    const MutexLock lock(mutex_);
     if (count_ == 0) {
       waiter_ = queue;
       // Under the lock: a signal from now on finds the queue suspended.
@@ -29,11 +29,9 @@ void TarnReportingQueueSemaphore::wait(const std::shared_ptr<platform::Suspendab
 
 // A signal that came while the time ran out counts as one in time.
 bool TarnReportingQueueSemaphore::take() {
-  const std::lock_guard lock(mutex_);
+  const MutexLock lock(mutex_);
   waiter_.reset();
-  if (count_ == 0) {
-    return false;
-  }
+  if (count_ == 0) return false;
   --count_;
   return true;
 }

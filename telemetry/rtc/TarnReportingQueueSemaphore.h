@@ -1,6 +1,6 @@
 // TarnReportingQueueSemaphore: a counting semaphore on which a queue waits instead of a thread.
 //
-// What the waiter would do behind its wait it hands over as `then`; its queue is suspended until a signal comes or the
+// What the waiter would do after its wait it hands over as `then`; its queue is suspended until a signal comes or the
 // time is up. A signal that nobody waits for is kept for the next wait.
 //
 // Owner: whoever waits; it lives until `then` was called. Threads: signal() any, wait() the queue's.
@@ -9,10 +9,10 @@
 #include <chrono>
 #include <cstddef>
 #include <memory>
-#include <mutex>
 
 #include "platform/UniqueFunction.h"
 #include "platform/WorkQueue.h"
+#include "plist/ThreadSafety.h"
 
 namespace tarn {
 
@@ -33,10 +33,9 @@ class TarnReportingQueueSemaphore {
  private:
   bool take();
 
-  std::mutex mutex_;
-  // Guarded by mutex_.
-  std::size_t count_ = 0;
-  std::shared_ptr<platform::SuspendableQueue> waiter_;
+  Mutex mutex_;
+  std::size_t count_ TARN_GUARDED_BY(mutex_) = 0;
+  std::shared_ptr<platform::SuspendableQueue> waiter_ TARN_GUARDED_BY(mutex_);
 };
 
 }  // namespace tarn

@@ -192,7 +192,7 @@ void TarnReportingRtcMirror::_sendMessage(const MessagePointer& message) {
         LogLevel::Debug, "RTCReportingAgent %@ : message %@ : category %i : type %i",
         [&] { return rtcReportingSession_->description(); }, message->message(),
         static_cast<std::int32_t>(message->category()), type);
-  } else if (result.error) {
+  } else if (result.error.failed()) {
     kLog(LogLevel::Error, "error sending message %@", result.error->text);
   }
 }

@@ -51,7 +51,7 @@ class TarnReportingRtcMirror : public std::enable_shared_from_this<TarnReporting
     std::int64_t reporterID;
   };
 
-  // The service outlives this. Behind so many bytes the summary event is cut.
+  // The service outlives this. After so many bytes the summary event is cut.
   explicit TarnReportingRtcMirror(platform::RtcReportingService& service,
                                   std::size_t longestSummary = TarnReportingRtcSummary::kLongestText)
       : service_(service), longestSummary_(longestSummary) {}

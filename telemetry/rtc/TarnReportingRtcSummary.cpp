@@ -57,9 +57,7 @@ TarnReportingRtcSummary TarnReportingMakeRtcSummary(
   Table table;
   table.append(kSummaryEvent, static_cast<unsigned>(serviceType));
   for (const auto& message : messages) {
-    if (message->isRedundant() || !message->isSessionStarted()) {
-      continue;
-    }
+    if (message->isRedundant() || !message->isSessionStarted()) continue;
     if (table.bytes() >= longestText) {
       summary.complete = false;
       break;

@@ -19,7 +19,7 @@
 namespace tarn {
 
 struct TarnReportingRtcSummary {
-  // A payload has its limits, and so does what takes it in: behind so many bytes of keys and values no more messages
+  // A payload has its limits, and so does what takes it in: after so many bytes of keys and values no more messages
   // are added. As JSON a byte may become six, and what stands in for the service takes no text of a gigabyte.
   static constexpr std::size_t kLongestText = std::size_t{128} << 20U;
 

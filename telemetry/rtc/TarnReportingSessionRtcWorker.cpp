@@ -42,9 +42,7 @@ TarnReportingRtcMirror::Stopped snapshotOf(const TarnReportingSession& session) 
 std::unique_ptr<TarnReportingSessionRtcWorker> TarnReportingSessionRtcWorker::initWithSession(
     const std::shared_ptr<TarnReportingSession>& session) {
   platform::RtcReportingService* const service = TarnReportingFacilities().rtcReporting;
-  if (service == nullptr || session->serviceType() == AudioServiceType::Test) {
-    return nullptr;
-  }
+  if (service == nullptr || session->serviceType() == AudioServiceType::Test) return nullptr;
   return std::make_unique<TarnReportingSessionRtcWorker>(session, std::make_shared<TarnReportingRtcMirror>(*service));
 }
 
@@ -78,9 +76,7 @@ const std::shared_ptr<platform::SuspendableQueue>& TarnReportingSessionRtcWorker
 
 bool TarnReportingSessionRtcWorker::start() {
   const std::shared_ptr<TarnReportingSession> owner = session();
-  if (!owner || owner->serviceType() == AudioServiceType::Test) {
-    return false;
-  }
+  if (!owner || owner->serviceType() == AudioServiceType::Test) return false;
   std::string serviceName(owner->serviceName());
   serviceName += kServiceNameSuffix;
   // At once: a completion that comes after the session's stop keeps the worker out of the next start.
@@ -99,9 +95,7 @@ void TarnReportingSessionRtcWorker::handleMessage(const std::shared_ptr<TarnRepo
 
 void TarnReportingSessionRtcWorker::stop() {
   const std::shared_ptr<TarnReportingSession> owner = session();
-  if (!owner) {
-    return;
-  }
+  if (!owner) return;
   if (mirror_->isStarting()) {
     rtcReportingQueue()->help(kStartHelp);  // so that it completes before this stop
   }

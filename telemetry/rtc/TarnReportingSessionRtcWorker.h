@@ -3,7 +3,7 @@
 // folds all of the session's messages together.
 //
 // All traffic with the service runs on a private serial queue, so that it sees the events in the order in which the
-// session handed them over, and what comes while its session is still being set up waits behind that. The worker only
+// session handed them over, and what comes while its session is still being set up waits after that. The worker only
 // captures and hands over; see TarnReportingRtcMirror for the rest. It runs for every service type but "test", in
 // single-message sessions too.
 #pragma once
@@ -38,7 +38,7 @@ class TarnReportingSessionRtcWorker : public TarnReportingSessionWorkerProtocol,
   static bool shouldBatchRTCReportingEventsForServiceType(AudioServiceType serviceType);
 
   // Also set, on a thread of the service, by a completion of the start that has a list, whenever it comes. One that
-  // comes behind the stop thus keeps the worker out of the session's next start.
+  // comes after the stop thus keeps the worker out of the session's next start.
   bool started() const noexcept override;
   void setStarted(bool started) noexcept override;
   // Whether a session of the service can be used. Threads: any.

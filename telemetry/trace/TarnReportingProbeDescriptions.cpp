@@ -54,9 +54,7 @@ std::optional<std::vector<plist::Dictionary>> readProbeDescriptions(std::string_
     return std::nullopt;
   }
   const plist::ValueView root = reading.value;
-  if (root.kind() == plist::Kind::Dictionary) {
-    return std::vector<plist::Dictionary>{root.dictionary()};
-  }
+  if (root.kind() == plist::Kind::Dictionary) return std::vector<plist::Dictionary>{root.dictionary()};
   if (root.kind() != plist::Kind::Array) {
     kLog(LogLevel::Error, "unsupported root class %@", className(root.kind()));
     return std::nullopt;

@@ -66,9 +66,7 @@ TarnReportingSessionTraceWorker::~TarnReportingSessionTraceWorker() = default;
 
 bool TarnReportingSessionTraceWorker::start() {
   const std::shared_ptr<TarnReportingSession> owner = session();
-  if (startedTracing_ || !owner || !isTraced(*owner)) {
-    return started();
-  }
+  if (startedTracing_ || !owner || !isTraced(*owner)) return started();
   const plist::Dictionary configuration = owner->configuration();
   const std::string_view descriptions = configuredText(configuration, kProbeDescriptionsKey);
   if (!TarnReportingFacilities().fileSystem.exists(descriptions)) {
@@ -77,9 +75,7 @@ bool TarnReportingSessionTraceWorker::start() {
     return started();
   }
   recording_ = makeRecording(configuration);
-  if (!recording_) {
-    return started();
-  }
+  if (!recording_) return started();
   startedTracing_ = true;
   setStarted(recording_->start());
   return started();
@@ -87,13 +83,9 @@ bool TarnReportingSessionTraceWorker::start() {
 
 void TarnReportingSessionTraceWorker::stop() {
   const std::shared_ptr<TarnReportingSession> owner = session();
-  if (!startedTracing_ || !owner || !isTraced(*owner)) {
-    return;
-  }
+  if (!startedTracing_ || !owner || !isTraced(*owner)) return;
   startedTracing_ = false;
-  if (recording_->stop() != TarnReportingTraceRecording::End::Completed) {
-    return;
-  }
+  if (recording_->stop() != TarnReportingTraceRecording::End::Completed) return;
   // The queue stands still meanwhile, and is known to.
   const auto block = TarnReportingFacilities().conditions.blockOnPurpose();
   TarnReportingTraceResults results(*owner, mPerfDataName_, recording_->eventsLeftOut());

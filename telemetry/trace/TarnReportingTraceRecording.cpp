@@ -1,6 +1,5 @@
 #include "telemetry/trace/TarnReportingTraceRecording.h"
 
-#include <mutex>
 #include <string_view>
 #include <utility>
 
@@ -28,9 +27,7 @@ bool TarnReportingTraceRecording::start() {
   const auto starting = traceSession();
   starting->setDelegate(weak_from_this());
   starting->startTrace();
-  if (TarnReportingUtilityWait(*condition_, kStartWait, answered_)) {
-    return true;
-  }
+  if (TarnReportingUtilityWait(*condition_, kStartWait, answered_)) return true;
   kLog(LogLevel::Error, "timed out waiting for performance trace to start");
   if (const auto late = traceSession(); late && late->isValid()) {
     late->stopTrace();
@@ -40,9 +37,7 @@ bool TarnReportingTraceRecording::start() {
 
 TarnReportingTraceRecording::End TarnReportingTraceRecording::stop() {
   const auto stopping = traceSession();
-  if (!stopping) {
-    return End::NoTrace;
-  }
+  if (!stopping) return End::NoTrace;
   stopping->stopTrace();
   if (!TarnReportingUtilityWait(*condition_, kStopWait, completed_)) {
     kLog(LogLevel::Error, "timed out waiting for performance trace to stop.  No pdj file wil be generated. ");
@@ -52,20 +47,18 @@ TarnReportingTraceRecording::End TarnReportingTraceRecording::stop() {
 }
 
 std::optional<std::string> TarnReportingTraceRecording::finalTraceURL() const {
-  const std::lock_guard lock(*condition_);
+  const MutexLock lock(*condition_);
   return finalTraceURL_;
 }
 
 std::uint64_t TarnReportingTraceRecording::eventsLeftOut() const {
-  const std::lock_guard lock(*condition_);
+  const MutexLock lock(*condition_);
   return eventsLeftOut_;
 }
 
-void TarnReportingTraceRecording::performanceTraceDidStart(const platform::MaybeError& error) {
-  if (!isFirst(startTold_)) {
-    return;
-  }
-  if (error) {
+void TarnReportingTraceRecording::performanceTraceDidStart(const Status& error) {
+  if (const MutexLock lock(*condition_); std::exchange(startTold_, true)) return;
+  if (error.failed()) {
     clearTraceSession();
     kLog(LogLevel::Error, "performanceTraceDidStart %@", error->text);
   } else {
@@ -74,11 +67,9 @@ void TarnReportingTraceRecording::performanceTraceDidStart(const platform::Maybe
   TarnReportingUtilitySignal(*condition_, answered_);
 }
 
-void TarnReportingTraceRecording::performanceTraceDidStop(const platform::MaybeError& error) {
-  if (!isFirst(stopTold_)) {
-    return;
-  }
-  if (error) {
+void TarnReportingTraceRecording::performanceTraceDidStop(const Status& error) {
+  if (const MutexLock lock(*condition_); std::exchange(stopTold_, true)) return;
+  if (error.failed()) {
     clearTraceSession();
     kLog(LogLevel::Error, "performanceTraceDidStop %@", error->text);
   } else {
@@ -87,21 +78,19 @@ void TarnReportingTraceRecording::performanceTraceDidStop(const platform::MaybeE
 }
 
 void TarnReportingTraceRecording::performanceTraceDidComplete(const std::string& location, const std::string&,
-                                                              const platform::MaybeError& error) {
-  if (!isFirst(completionTold_)) {
-    return;
-  }
+                                                              const Status& error) {
+  if (const MutexLock lock(*condition_); std::exchange(completionTold_, true)) return;
   if (const auto completed = clearTraceSession()) {
     completed->setDelegate({});
     const std::uint64_t leftOut = completed->eventsLeftOut();
-    const std::lock_guard lock(*condition_);
+    const MutexLock lock(*condition_);
     eventsLeftOut_ = leftOut;
   }
-  if (error) {
+  if (error.failed()) {
     kLog(LogLevel::Error, "performanceTraceDidComplete %@", error->text);
   } else {
     {
-      const std::lock_guard lock(*condition_);
+      const MutexLock lock(*condition_);
       finalTraceURL_ = location;
     }
     kLog(LogLevel::Info, "Performance Trace Completed: %@", location);
@@ -112,18 +101,13 @@ void TarnReportingTraceRecording::performanceTraceDidComplete(const std::string&
 }
 
 std::shared_ptr<platform::PerformanceTraceSession> TarnReportingTraceRecording::traceSession() const {
-  const std::lock_guard lock(*condition_);
+  const MutexLock lock(*condition_);
   return traceSession_;
 }
 
 std::shared_ptr<platform::PerformanceTraceSession> TarnReportingTraceRecording::clearTraceSession() {
-  const std::lock_guard lock(*condition_);
+  const MutexLock lock(*condition_);
   return std::exchange(traceSession_, nullptr);
-}
-
-bool TarnReportingTraceRecording::isFirst(bool& told) {
-  const std::lock_guard lock(*condition_);
-  return !std::exchange(told, true);
 }
 
 }  // namespace tarn

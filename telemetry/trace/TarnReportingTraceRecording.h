@@ -2,7 +2,7 @@
 // between.
 //
 // Each trace has a recording of its own, so that a callback of one that was given up is never taken for one of the
-// next. A callback that comes a second time is passed over.
+// next. A callback that comes a second time is ignored.
 //
 // Owner: the trace worker; the facility holds it weakly, as its delegate. Threads: start and stop on the server queue,
 // which they block; the callbacks on any thread, also after the last wait or within start and stop.
@@ -15,6 +15,7 @@
 
 #include "platform/Condition.h"
 #include "platform/PerformanceTraceService.h"
+#include "plist/ThreadSafety.h"
 
 namespace tarn {
 
@@ -41,27 +42,25 @@ class TarnReportingTraceRecording final : public platform::PerformanceTraceDeleg
   // How many events it lacks.
   std::uint64_t eventsLeftOut() const;
 
-  void performanceTraceDidStart(const platform::MaybeError& error) override;
-  void performanceTraceDidStop(const platform::MaybeError& error) override;
-  void performanceTraceDidComplete(const std::string& location, const std::string& token,
-                                   const platform::MaybeError& error) override;
+  void performanceTraceDidStart(const Status& error) override;
+  void performanceTraceDidStop(const Status& error) override;
+  void performanceTraceDidComplete(const std::string& location, const std::string& token, const Status& error) override;
 
  private:
   std::shared_ptr<platform::PerformanceTraceSession> traceSession() const;
   // Lets go of the session; the one that it was, so that it ends outside the lock.
   std::shared_ptr<platform::PerformanceTraceSession> clearTraceSession();
-  bool isFirst(bool& told);
 
   const std::shared_ptr<platform::Condition> condition_;
-  // Guarded by condition_:
+  // The flags that are waited for: TarnReportingUtilityWait and Signal, which get them, take the lock themselves.
   bool answered_ = false;   // the start: the facility told something, be it the end
   bool completed_ = false;  // the stop
-  std::shared_ptr<platform::PerformanceTraceSession> traceSession_;
-  std::optional<std::string> finalTraceURL_;
-  std::uint64_t eventsLeftOut_ = 0;
-  bool startTold_ = false;
-  bool stopTold_ = false;
-  bool completionTold_ = false;
+  std::shared_ptr<platform::PerformanceTraceSession> traceSession_ TARN_GUARDED_BY(*condition_);
+  std::optional<std::string> finalTraceURL_ TARN_GUARDED_BY(*condition_);
+  std::uint64_t eventsLeftOut_ TARN_GUARDED_BY(*condition_) = 0;
+  bool startTold_ TARN_GUARDED_BY(*condition_) = false;
+  bool stopTold_ TARN_GUARDED_BY(*condition_) = false;
+  bool completionTold_ TARN_GUARDED_BY(*condition_) = false;
 };
 
 }  // namespace tarn

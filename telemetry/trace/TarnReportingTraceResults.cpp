@@ -45,7 +45,8 @@ double millisecondsOf(const platform::SignpostInterval& interval) {
 // The library; null when it or a class is missing, and then the process is ending.
 std::shared_ptr<platform::TraceAnalysisLibrary> loadLibrary() {
   const platform::Facilities& facilities = TarnReportingFacilities();
-  if (const auto error = facilities.processEnvironment.set(kAcknowledgementVariable, kAcknowledgement)) {
+  if (const auto error = facilities.processEnvironment.set(kAcknowledgementVariable, kAcknowledgement);
+      error.failed()) {
     kLog(LogLevel::Error, "failed to set %@: %@", kAcknowledgementVariable, error->text);
   }
   platform::TraceAnalysis::Loaded loaded = facilities.traceAnalysis->load();
@@ -92,22 +93,16 @@ void TarnReportingTraceResults::processTraceSkein(const std::optional<std::strin
   }
   const std::optional<std::vector<plist::Dictionary>> descriptions =
       readProbeDescriptions(configuredText(session_.configuration(), kProbeDescriptionsKey));
-  if (!descriptions) {
-    return;
-  }
+  if (!descriptions) return;
   const auto library = loadLibrary();
-  if (!library) {
-    return;
-  }
+  if (!library) return;
   const auto model = library->openTrace(*tracePath);
   if (model.failed()) {
     kLog(LogLevel::Error, "failed to create Skein model: %@", model.error->text);
     return;
   }
   // Without a writer there is nowhere to write to.
-  if (!createPDWriter()) {
-    return;
-  }
+  if (!createPDWriter()) return;
   processSignposts(*model.value);
   for (const platform::TraceProbe& probe : library->probesForDictionaries(*descriptions, *model.value)) {
     processProbe(probe);
@@ -125,7 +120,7 @@ bool TarnReportingTraceResults::createPDWriter() {
   if (directory.empty()) {
     directory = files.wellKnownDirectory(platform::WellKnownDirectory::DiagnosticLogs) + "/Audio/Traces";
   }
-  if (const auto error = files.createDirectories(directory, kDirectoryPermissions)) {
+  if (const auto error = files.createDirectories(directory, kDirectoryPermissions); error.failed()) {
     kLog(LogLevel::Error, "can't create logging directory at %@: %@", directory, error->text);
   }
   std::string outputFile(configuredText(configuration, kOutputFileNameKey));
@@ -158,9 +153,7 @@ void TarnReportingTraceResults::processSignposts(platform::TraceModel& trace) {
   std::vector<Sums> sums;
   std::unordered_map<std::string_view, std::size_t> places;  // in `sums`, by names that lie in `intervals`
   for (const platform::SignpostInterval& interval : intervals.value) {
-    if (!isOurs(interval)) {
-      continue;
-    }
+    if (!isOurs(interval)) continue;
     const double milliseconds = millisecondsOf(interval);
     kLog(LogLevel::Debug, "name:%@ time:%f ms", interval.name, milliseconds);
     writeValue(interval.name, milliseconds);
@@ -182,9 +175,7 @@ void TarnReportingTraceResults::processProbe(const platform::TraceProbe& probe) 
   for (const platform::TraceProbe& child : probe.children) {
     processProbe(child);
   }
-  if (!probe.measuresSignpostIntervals) {
-    return;
-  }
+  if (!probe.measuresSignpostIntervals) return;
   for (const platform::SignpostInterval& event : probe.events) {
     if (currentProbe_ && *currentProbe_ != probe.name) {
       writeSums(*currentProbe_, totalTimeValue_, totalTimeMetrics_);
@@ -230,12 +221,12 @@ void TarnReportingTraceResults::writeExtensions() {
 }
 
 void TarnReportingTraceResults::closeAndMove() {
-  if (const auto error = mWriter_->close()) {
+  if (const auto error = mWriter_->close(); error.failed()) {
     kLog(LogLevel::Error, "Failed to close perfdata writer. errno: %d", error->code);
     return;
   }
   kLog(LogLevel::Info, "Moving file from tempWriterPath: %@ to %@", tempWriterPath_, fullWriterPath_);
-  if (TarnReportingFacilities().fileSystem.moveFile(tempWriterPath_, fullWriterPath_)) {
+  if (TarnReportingFacilities().fileSystem.moveFile(tempWriterPath_, fullWriterPath_).failed()) {
     kLog(LogLevel::Error, "Failed to move file");
   }
 }

@@ -2,7 +2,7 @@
 // milliseconds:
 //
 //   every signpost interval of the audio subsystems, then per name "NAME Total" and "NAME AVG";
-//   every event of the probes that the session's configuration describes, children first, with the same two sums behind
+//   every event of the probes that the session's configuration describes, children first, with the same two sums after
 //   the last event of a probe. Events of probes of one name that follow each other are summed together.
 //
 // The measurements of a trace that lacks events are those of what is left of it: such a file has an extension

@@ -17,10 +17,12 @@ class FakeAccessoryQueries final : public platform::AccessoryQueries {
   using Accessory = std::map<platform::AccessoryPart, plist::Dictionary>;
 
   // The interface.
-  platform::Outcome<std::uint16_t> enumerate() override {
+  Result<std::uint16_t> enumerate() override {
     ++enumerations_;
-    if (onEnumerate_) onEnumerate_();
-    if (error_) return {0, error_};
+    if (onEnumerate_) {
+      onEnumerate_();
+    }
+    if (error_.failed()) return {0, error_};
     found_ = accessories_;
     return {static_cast<std::uint16_t>(found_.size()), {}};
   }
@@ -39,7 +41,7 @@ class FakeAccessoryQueries final : public platform::AccessoryQueries {
   void clear() { accessories_.clear(); }
   // What happens while an enumeration runs.
   void onEnumerate(std::function<void()> hook) { onEnumerate_ = std::move(hook); }
-  void failEnumeration(platform::MaybeError error) { error_ = std::move(error); }
+  void failEnumeration(Status error) { error_ = std::move(error); }
 
   // Observations.
   std::size_t enumerations() const noexcept { return enumerations_; }
@@ -49,7 +51,7 @@ class FakeAccessoryQueries final : public platform::AccessoryQueries {
  private:
   std::vector<Accessory> accessories_;
   std::vector<Accessory> found_;
-  platform::MaybeError error_;
+  Status error_;
   std::function<void()> onEnumerate_;
   mutable std::vector<std::uint16_t> askedFor_;
   std::size_t enumerations_ = 0;

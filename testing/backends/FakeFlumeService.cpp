@@ -57,18 +57,18 @@ class FakeFlumeService::Subscription final : public platform::FlumeSubscription 
   const FlumeChannelSet channels_;
 };
 
-platform::Outcome<std::shared_ptr<const FlumeChannelSet>> FakeFlumeService::copyChannels(
+Result<std::shared_ptr<const FlumeChannelSet>> FakeFlumeService::copyChannels(
     const std::optional<std::string>& group, const std::optional<std::string>& subGroup) {
-  platform::Outcome<std::shared_ptr<const FlumeChannelSet>> outcome;
-  if (fails(Step::CopyChannels, outcome.error)) return outcome;
+  Result<std::shared_ptr<const FlumeChannelSet>> result;
+  if (fails(Step::CopyChannels, result.error)) return result;
   FlumeChannelSet set;
   for (const auto& channel : channels_) {
     if ((!group || channel.name.group == group) && (!subGroup || channel.name.subGroup == subGroup)) {
       set.push_back(channel.name);
     }
   }
-  outcome.value = std::make_shared<const FlumeChannelSet>(std::move(set));
-  return outcome;
+  result.value = std::make_shared<const FlumeChannelSet>(std::move(set));
+  return result;
 }
 
 FakeFlumeService::Subscribed FakeFlumeService::subscribe(const FlumeChannelSet& channels) {
@@ -76,39 +76,47 @@ FakeFlumeService::Subscribed FakeFlumeService::subscribe(const FlumeChannelSet& 
   if (fails(Step::Subscribe, subscribed.error)) return subscribed;
   FlumeChannelSet covered = channels;
   std::erase_if(covered, [this](const FlumeChannelName& name) { return holds(refused_, name); });
-  if (!withholdsHandle_) subscribed.subscription = std::make_shared<Subscription>(covered);
-  if (!withholdsChannels_) subscribed.channels = std::make_shared<const FlumeChannelSet>(std::move(covered));
+  if (!withholdsHandle_) {
+    subscribed.subscription = std::make_shared<Subscription>(covered);
+  }
+  if (!withholdsChannels_) {
+    subscribed.channels = std::make_shared<const FlumeChannelSet>(std::move(covered));
+  }
   return subscribed;
 }
 
-platform::FlumeService::SamplesOutcome FakeFlumeService::createSamples(platform::FlumeSubscription& subscription,
-                                                                       const FlumeChannelSet& subscribedChannels) {
-  SamplesOutcome outcome;
-  if (fails(Step::CreateSamples, outcome.error)) return outcome;
+platform::FlumeService::SamplesResult FakeFlumeService::createSamples(platform::FlumeSubscription& subscription,
+                                                                      const FlumeChannelSet& subscribedChannels) {
+  SamplesResult result;
+  if (fails(Step::CreateSamples, result.error)) return result;
   const FlumeChannelSet& covered = static_cast<const Subscription&>(subscription).channels();
   FlumeSamples samples;
   for (const auto& name : subscribedChannels) {
     const auto* channel = find(channels_, name);
-    if (channel != nullptr && holds(covered, name)) samples.push_back(*channel);
+    if (channel != nullptr && holds(covered, name)) {
+      samples.push_back(*channel);
+    }
   }
-  outcome.value = std::make_shared<const FlumeSamples>(std::move(samples));
-  return outcome;
+  result.value = std::make_shared<const FlumeSamples>(std::move(samples));
+  return result;
 }
 
-platform::FlumeService::SamplesOutcome FakeFlumeService::createDelta(const std::shared_ptr<const FlumeSamples>& earlier,
-                                                                     const std::shared_ptr<const FlumeSamples>& later) {
-  SamplesOutcome outcome;
-  if (fails(Step::CreateDelta, outcome.error)) return outcome;
+platform::FlumeService::SamplesResult FakeFlumeService::createDelta(const std::shared_ptr<const FlumeSamples>& earlier,
+                                                                    const std::shared_ptr<const FlumeSamples>& later) {
+  SamplesResult result;
+  if (fails(Step::CreateDelta, result.error)) return result;
   if (earlier == nullptr || later == nullptr) {
-    outcome.value = later;
-    return outcome;
+    result.value = later;
+    return result;
   }
   FlumeSamples delta = *later;
   for (auto& channel : delta) {
-    if (const auto* before = find(*earlier, channel.name)) subtract(channel, *before);
+    if (const auto* before = find(*earlier, channel.name)) {
+      subtract(channel, *before);
+    }
   }
-  outcome.value = std::make_shared<const FlumeSamples>(std::move(delta));
-  return outcome;
+  result.value = std::make_shared<const FlumeSamples>(std::move(delta));
+  return result;
 }
 
 void FakeFlumeService::setChannel(FlumeChannel channel) {
@@ -134,12 +142,14 @@ std::size_t FakeFlumeService::calls(Step step) const {
   return found == calls_.end() ? 0 : found->second;
 }
 
-bool FakeFlumeService::fails(Step step, platform::MaybeError& error) {
+bool FakeFlumeService::fails(Step step, Status& error) {
   ++calls_[step];
   happened(kStepNames[static_cast<std::size_t>(step)]);
   const auto found = failures_.find(step);
   if (found == failures_.end()) return false;
-  if (found->second) error = platform::PlatformError{*found->second, "ordered by the test"};
+  if (found->second) {
+    error = Error{*found->second, "ordered by the test"};
+  }
   return true;
 }
 

@@ -23,13 +23,13 @@ class FakeFlumeService final : public platform::FlumeService, public Recorded {
   enum class Step { CopyChannels, Subscribe, CreateSamples, CreateDelta };
 
   // The interface.
-  platform::Outcome<std::shared_ptr<const platform::FlumeChannelSet>> copyChannels(
+  Result<std::shared_ptr<const platform::FlumeChannelSet>> copyChannels(
       const std::optional<std::string>& group, const std::optional<std::string>& subGroup) override;
   Subscribed subscribe(const platform::FlumeChannelSet& channels) override;
-  SamplesOutcome createSamples(platform::FlumeSubscription& subscription,
-                               const platform::FlumeChannelSet& subscribedChannels) override;
-  SamplesOutcome createDelta(const std::shared_ptr<const platform::FlumeSamples>& earlier,
-                             const std::shared_ptr<const platform::FlumeSamples>& later) override;
+  SamplesResult createSamples(platform::FlumeSubscription& subscription,
+                              const platform::FlumeChannelSet& subscribedChannels) override;
+  SamplesResult createDelta(const std::shared_ptr<const platform::FlumeSamples>& earlier,
+                            const std::shared_ptr<const platform::FlumeSamples>& later) override;
 
   // Controls.
   // Adds a channel, or replaces the one of the same name.
@@ -51,7 +51,7 @@ class FakeFlumeService final : public platform::FlumeService, public Recorded {
   class Subscription;
 
   // Whether the step fails, with its error in `error`; counts the call.
-  bool fails(Step step, platform::MaybeError& error);
+  bool fails(Step step, Status& error);
 
   platform::FlumeSamples channels_;
   std::map<Step, std::optional<std::int64_t>> failures_;

@@ -37,13 +37,12 @@ class FakePerfDataWriters final : public platform::PerfDataWriters {
   FakePerfDataWriters& operator=(const FakePerfDataWriters&) = delete;
 
   // The interface.
-  platform::Outcome<std::unique_ptr<platform::PerfDataWriter>> open(std::string_view path, std::string_view name,
-                                                                    std::int32_t resultsVersion,
-                                                                    std::uint32_t flags) override;
+  Result<std::unique_ptr<platform::PerfDataWriter>> open(std::string_view path, std::string_view name,
+                                                         std::int32_t resultsVersion, std::uint32_t flags) override;
 
   // Controls. An error of nothing means success.
-  void failOpen(platform::MaybeError error) { openError_ = std::move(error); }
-  void failClose(platform::MaybeError error) { closeError_ = std::move(error); }
+  void failOpen(Status error) { openError_ = std::move(error); }
+  void failClose(Status error) { closeError_ = std::move(error); }
 
   // Observations.
   const std::vector<std::shared_ptr<const File>>& files() const noexcept { return files_; }
@@ -51,8 +50,8 @@ class FakePerfDataWriters final : public platform::PerfDataWriters {
  private:
   class Writer;
 
-  platform::MaybeError openError_;
-  platform::MaybeError closeError_;
+  Status openError_;
+  Status closeError_;
   std::vector<std::shared_ptr<const File>> files_;
 };
 

@@ -5,15 +5,14 @@
 
 namespace tarn::testing {
 
-using platform::MaybeError;
 using platform::PerformanceTraceDelegate;
 
 struct FakePerformanceTraceService::Ledger {
   std::mutex mutex;
   bool makesSessions = true;
-  MaybeError startError;
-  MaybeError stopError;
-  MaybeError completionError;
+  Status startError;
+  Status stopError;
+  Status completionError;
   std::uint64_t eventsLeftOut = 0;
   std::vector<Trace> traces;
   ReplyFaults callbacks;
@@ -37,22 +36,24 @@ class FakePerformanceTraceService::Session final : public platform::PerformanceT
   }
 
   void startTrace() override {
-    MaybeError error;
+    Status error;
     {
       const std::lock_guard lock(ledger_->mutex);
       ++ledger_->traces[index_].starts;
       error = ledger_->startError;
-      valid_ = !error;
+      valid_ = error.ok();
     }
     // A session that was let go of makes no more callbacks.
     ledger_->callbacks.deliver([weak = weak_from_this(), error] {
-      if (const auto self = weak.lock()) self->tell([&](auto& delegate) { delegate.performanceTraceDidStart(error); });
+      if (const auto self = weak.lock()) {
+        self->tell([&](auto& delegate) { delegate.performanceTraceDidStart(error); });
+      }
     });
   }
 
   void stopTrace() override {
-    MaybeError stopError;
-    MaybeError completionError;
+    Status stopError;
+    Status completionError;
     {
       const std::lock_guard lock(ledger_->mutex);
       ++ledger_->traces[index_].stops;
@@ -61,7 +62,9 @@ class FakePerformanceTraceService::Session final : public platform::PerformanceT
       valid_ = false;
     }
     ledger_->callbacks.deliver([weak = weak_from_this(), stopError, completionError] {
-      if (const auto self = weak.lock()) self->tellStopped(stopError, completionError);
+      if (const auto self = weak.lock()) {
+        self->tellStopped(stopError, completionError);
+      }
     });
   }
 
@@ -83,14 +86,16 @@ class FakePerformanceTraceService::Session final : public platform::PerformanceT
       const std::lock_guard lock(ledger_->mutex);
       delegate = delegate_.lock();
     }
-    if (delegate != nullptr) call(*delegate);
+    if (delegate != nullptr) {
+      call(*delegate);
+    }
   }
 
-  void tellStopped(const MaybeError& stopError, const MaybeError& completionError) {
+  void tellStopped(const Status& stopError, const Status& completionError) {
     tell([&](auto& delegate) { delegate.performanceTraceDidStop(stopError); });
-    if (stopError) return;
+    if (stopError.failed()) return;
     const auto number = std::to_string(index_ + 1);
-    const auto location = completionError ? std::string() : "/device/traces/" + number;
+    const auto location = completionError.failed() ? std::string() : "/device/traces/" + number;
     tell([&](auto& delegate) { delegate.performanceTraceDidComplete(location, "trace-" + number, completionError); });
   }
 
@@ -120,17 +125,17 @@ void FakePerformanceTraceService::setMakesSessions(bool makes) {
   ledger_->makesSessions = makes;
 }
 
-void FakePerformanceTraceService::failStart(MaybeError error) {
+void FakePerformanceTraceService::failStart(Status error) {
   const std::lock_guard lock(ledger_->mutex);
   ledger_->startError = std::move(error);
 }
 
-void FakePerformanceTraceService::failStop(MaybeError error) {
+void FakePerformanceTraceService::failStop(Status error) {
   const std::lock_guard lock(ledger_->mutex);
   ledger_->stopError = std::move(error);
 }
 
-void FakePerformanceTraceService::failCompletion(MaybeError error) {
+void FakePerformanceTraceService::failCompletion(Status error) {
   const std::lock_guard lock(ledger_->mutex);
   ledger_->completionError = std::move(error);
 }

@@ -36,9 +36,9 @@ class FakePerformanceTraceService final : public platform::PerformanceTraceServi
 
   // Controls. An error of nothing means that the step succeeds.
   void setMakesSessions(bool makes);
-  void failStart(platform::MaybeError error);
-  void failStop(platform::MaybeError error);
-  void failCompletion(platform::MaybeError error);
+  void failStart(Status error);
+  void failStop(Status error);
+  void failCompletion(Status error);
   // How many events finished traces say that they lack.
   void setEventsLeftOut(std::uint64_t count);
   // How the callbacks come. A start is one delivery; so is a stop, with its two callbacks.

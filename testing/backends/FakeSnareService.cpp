@@ -46,7 +46,9 @@ class FakeSnareService::Reporter final : public platform::SnareReporter {
                            {Keys::kType, signature.type},
                            {Keys::kSubType, signature.subType},
                            {Keys::kSubTypeContext, signature.subTypeContext}};
-    if (signature.detectedProcess) made.merge({{Keys::kDetectedProcess, *signature.detectedProcess}});
+    if (signature.detectedProcess) {
+      made.merge({{Keys::kDetectedProcess, *signature.detectedProcess}});
+    }
     if (signature.triggerThresholdValues) {
       made.merge({{Keys::kTriggerThresholdValues, *signature.triggerThresholdValues}});
     }

@@ -11,9 +11,7 @@ bool FakeTallyService::eventIsInUse(std::string_view name) {
 
 void FakeTallyService::sendEventLazy(std::string_view name, PayloadCallback payload) {
   sentNames_.emplace_back(name);
-  if (!isInUse(name)) {
-    return;
-  }
+  if (!isInUse(name)) return;
   switch (calls_) {
     case PayloadCalls::AtOnce:
       events_.push_back({std::string(name), payload()});

@@ -32,14 +32,14 @@ class FakeTattleService final : public platform::TattleService, public Recorded 
 
   // Controls.
   // Completions carry this error; nothing: they succeed.
-  void refuseWith(platform::MaybeError error) { refusal_ = std::move(error); }
+  void refuseWith(Status error) { refusal_ = std::move(error); }
   ReplyFaults& replies() { return replies_; }
 
   // Observations.
   const std::vector<Prompt>& prompts() const noexcept { return prompts_; }
 
  private:
-  platform::MaybeError refusal_;
+  Status refusal_;
   std::vector<Prompt> prompts_;
   ReplyFaults replies_;
 };

@@ -5,8 +5,8 @@
 namespace tarn::testing {
 
 struct FakeTraceAnalysis::Content {
-  platform::MaybeError openingError;
-  platform::MaybeError intervalsError;
+  Status openingError;
+  Status intervalsError;
   std::vector<platform::SignpostInterval> intervals;
   std::vector<platform::TraceProbe> probes;
   std::vector<std::string> openedLocations;
@@ -17,7 +17,7 @@ class FakeTraceAnalysis::Trace final : public platform::TraceModel {
  public:
   explicit Trace(std::shared_ptr<Content> content) : content_(std::move(content)) {}
 
-  platform::Outcome<std::vector<platform::SignpostInterval>> allSignpostIntervals() override {
+  Result<std::vector<platform::SignpostInterval>> allSignpostIntervals() override {
     return {content_->intervals, content_->intervalsError};  // an error doesn't take away what was read before it
   }
 
@@ -29,9 +29,9 @@ class FakeTraceAnalysis::Library final : public platform::TraceAnalysisLibrary {
  public:
   explicit Library(std::shared_ptr<Content> content) : content_(std::move(content)) {}
 
-  platform::Outcome<std::shared_ptr<platform::TraceModel>> openTrace(std::string_view location) override {
+  Result<std::shared_ptr<platform::TraceModel>> openTrace(std::string_view location) override {
     content_->openedLocations.emplace_back(location);
-    if (content_->openingError) return {nullptr, content_->openingError};
+    if (content_->openingError.failed()) return {nullptr, content_->openingError};
     return {std::make_shared<Trace>(content_), {}};
   }
 
@@ -50,16 +50,18 @@ FakeTraceAnalysis::~FakeTraceAnalysis() = default;
 
 platform::TraceAnalysis::Loaded FakeTraceAnalysis::load() {
   ++loads_;
-  if (onLoad_) onLoad_();
+  if (onLoad_) {
+    onLoad_();
+  }
   if (!missingClass_.empty()) return {nullptr, missingClass_};
   return {std::make_shared<Library>(content_), {}};
 }
 
-void FakeTraceAnalysis::failOpening(platform::MaybeError error) {
+void FakeTraceAnalysis::failOpening(Status error) {
   content_->openingError = std::move(error);
 }
 
-void FakeTraceAnalysis::failIntervals(platform::MaybeError error) {
+void FakeTraceAnalysis::failIntervals(Status error) {
   content_->intervalsError = std::move(error);
 }
 

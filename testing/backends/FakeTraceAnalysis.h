@@ -27,8 +27,8 @@ class FakeTraceAnalysis final : public platform::TraceAnalysis {
   // What happens while the library is loaded.
   void onLoad(std::function<void()> hook) { onLoad_ = std::move(hook); }
   void setMissingClass(std::string name) { missingClass_ = std::move(name); }
-  void failOpening(platform::MaybeError error);
-  void failIntervals(platform::MaybeError error);
+  void failOpening(Status error);
+  void failIntervals(Status error);
   void setIntervals(std::vector<platform::SignpostInterval> intervals);
   void setProbes(std::vector<platform::TraceProbe> probes);
 

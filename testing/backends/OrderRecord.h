@@ -36,9 +36,7 @@ class OrderRecord {
     started_ = true;
   }
   void add(std::string_view verb, std::string_view what) {
-    if (!started_) {
-      return;
-    }
+    if (!started_) return;
     std::string entry(verb);
     if (!what.empty()) {
       entry.append(1, ' ').append(what);

@@ -77,7 +77,7 @@ void ReplyFaults::joinThreads() {
 
 void ReplyFaults::dropAll() {
   joinThreads();
-  std::deque<platform::Work> replies;  // destroyed behind the lock: a handler may have the last of something
+  std::deque<platform::Work> replies;  // destroyed after the lock: a handler may have the last of something
   const std::lock_guard lock(mutex_);
   replies.swap(held_);
 }

@@ -23,7 +23,7 @@ enum class ReplyFault {
   Drop,         // never; the handler is destroyed
   Hold,         // when the test calls deliverHeld(), be it after the asker's deadline or its end
   Delay,        // on the queue and after the time of delayOn()
-  Twice,        // two times, one behind the other
+  Twice,        // two times, one after the other
   OtherThread,  // on a new thread, while the caller goes on
 };
 

@@ -40,32 +40,32 @@ int listenAt(const std::string& path) {
   return fd;
 }
 
-TEST(TarnReportingClient, ConnectsToAListeningSocket) {
+TEST(ClientConnection, ConnectsToAListeningSocket) {
   const SocketPath place;
   const int listener = listenAt(place.path());
   ASSERT_GE(listener, 0);
-  const auto connected = TarnReportingClient::connect(place.path());
-  ASSERT_NE(connected.client, nullptr) << connected.error;
-  EXPECT_TRUE(connected.client->connected());
+  const auto connected = ClientConnection::connect(place.path());
+  ASSERT_TRUE(connected.ok()) << connected.error->text;
+  EXPECT_TRUE(connected.value->connected());
   ScriptedServer server(::accept(listener, nullptr, nullptr));
   const Served serving([&] { server.acknowledge(1); });
-  EXPECT_TRUE(connected.client->call(createReportingSession(5)).ok());
+  EXPECT_TRUE(connected.value->call(createReportingSession(5)).ok());
   ::close(listener);
 }
 
-TEST(TarnReportingClient, SaysWhyItCannotConnect) {
+TEST(ClientConnection, SaysWhyItCannotConnect) {
   const SocketPath place;
-  const auto missing = TarnReportingClient::connect(place.path());
-  EXPECT_EQ(missing.client, nullptr);
-  EXPECT_EQ(missing.errorNumber, ENOENT);
-  EXPECT_NE(missing.error.find(place.path()), std::string::npos);
+  const auto missing = ClientConnection::connect(place.path());
+  EXPECT_EQ(missing.value, nullptr);
+  EXPECT_EQ(missing.error.code(), ENOENT);
+  EXPECT_NE(missing.error.text().find(place.path()), std::string::npos);
   ::close(listenAt(place.path()));
-  EXPECT_EQ(TarnReportingClient::connect(place.path()).errorNumber, ECONNREFUSED);
-  EXPECT_EQ(TarnReportingClient::connect(std::string(200, 'x')).errorNumber, ENAMETOOLONG);
-  EXPECT_EQ(TarnReportingClient::connect("").client, nullptr);
+  EXPECT_EQ(ClientConnection::connect(place.path()).error.code(), ECONNREFUSED);
+  EXPECT_EQ(ClientConnection::connect(std::string(200, 'x')).error.code(), ENAMETOOLONG);
+  EXPECT_EQ(ClientConnection::connect("").value, nullptr);
 }
 
-TEST(TarnReportingClient, ALostConnectionFailsEverythingOutstandingThenTellsTheOwner) {
+TEST(ClientConnection, ALostConnectionFailsEverythingOutstandingThenTellsTheOwner) {
   Outcomes outcomes;
   Pair pair;
   Strings lost;
@@ -77,14 +77,16 @@ TEST(TarnReportingClient, ALostConnectionFailsEverythingOutstandingThenTellsTheO
   pair.client->send(getAllReporters(), outcomes.handler("all"));
   pair.client->send(reporterID(5), outcomes.handler("valid"));
   pair.server->hangUp();
-  while (pair.client->connected()) pair.client->wait(std::chrono::seconds(5));
+  while (pair.client->connected()) {
+    pair.client->wait(std::chrono::seconds(5));
+  }
   EXPECT_EQ(outcomes.heard(), (Strings{"start connection lost", "all connection lost", "valid connection lost"}));
   EXPECT_EQ(lost, Strings{"the service ended the connection"});
   EXPECT_EQ(pair.client->outstanding(), 0U);
   EXPECT_EQ(pair.client->fd(), -1);
 }
 
-TEST(TarnReportingClient, RepliesThatCameBeforeTheEndAreStillDelivered) {
+TEST(ClientConnection, RepliesThatCameBeforeTheEndAreStillDelivered) {
   Outcomes outcomes;
   Pair pair;
   pair.client->send(getAllReporters(), outcomes.handler("first"));
@@ -95,11 +97,13 @@ TEST(TarnReportingClient, RepliesThatCameBeforeTheEndAreStillDelivered) {
   pair.server->reply(first->id);
   pair.server->hangUp();
   pair.client->trySend(getAllReporters(), outcomes.handler("third"));
-  while (pair.client->connected()) pair.client->dispatch();
+  while (pair.client->connected()) {
+    pair.client->dispatch();
+  }
   EXPECT_EQ(outcomes.heard(), (Strings{"first ok", "second connection lost", "third connection lost"}));
 }
 
-TEST(TarnReportingClient, ACallOnALostConnectionSaysSo) {
+TEST(ClientConnection, ACallOnALostConnectionSaysSo) {
   Pair pair;
   pair.server->hangUp();
   EXPECT_EQ(pair.client->call(getAllReporters()).outcome, Outcome::ConnectionLost);
@@ -108,7 +112,7 @@ TEST(TarnReportingClient, ACallOnALostConnectionSaysSo) {
   EXPECT_EQ(pair.client->wait(std::chrono::seconds(5)), 0U);
 }
 
-TEST(TarnReportingClient, ABrokenPipeRaisesNoSignal) {
+TEST(ClientConnection, ABrokenPipeRaisesNoSignal) {
   Options options;
   options.autoFlushBytes = 0;
   Pair pair(options);
@@ -121,7 +125,7 @@ TEST(TarnReportingClient, ABrokenPipeRaisesNoSignal) {
   EXPECT_EQ(outcomes.heard(), Strings{"first connection lost"});
 }
 
-TEST(TarnReportingClient, AnUnreadableReplyEndsTheConnectionAndSaysWhy) {
+TEST(ClientConnection, AnUnreadableReplyEndsTheConnectionAndSaysWhy) {
   Pair pair;
   std::string why;
   pair.client->setLostHandler([&](const std::string& text) { why = text; });
@@ -131,7 +135,7 @@ TEST(TarnReportingClient, AnUnreadableReplyEndsTheConnectionAndSaysWhy) {
   EXPECT_EQ(why, "an unreadable reply: not a reply array");
 }
 
-TEST(TarnReportingClient, AReplyOverTheLimitEndsTheConnection) {
+TEST(ClientConnection, AReplyOverTheLimitEndsTheConnection) {
   Options options;
   options.maxReplyBytes = 10;
   Pair pair(options);
@@ -142,7 +146,7 @@ TEST(TarnReportingClient, AReplyOverTheLimitEndsTheConnection) {
   EXPECT_EQ(why, "a reply of 11 bytes is too long");
 }
 
-TEST(TarnReportingClient, CloseCancelsEverythingOutstanding) {
+TEST(ClientConnection, CloseCancelsEverythingOutstanding) {
   Outcomes outcomes;
   Pair pair;
   bool lost = false;
@@ -155,7 +159,7 @@ TEST(TarnReportingClient, CloseCancelsEverythingOutstanding) {
   EXPECT_EQ(pair.client->send(getAllReporters()), SendStatus::NotConnected);
 }
 
-TEST(TarnReportingClient, DestructionCancelsToo) {
+TEST(ClientConnection, DestructionCancelsToo) {
   Outcomes outcomes;
   {
     Pair pair;
@@ -164,7 +168,7 @@ TEST(TarnReportingClient, DestructionCancelsToo) {
   EXPECT_EQ(outcomes.heard(), Strings{"start cancelled"});
 }
 
-TEST(TarnReportingClient, AHandlerMayClose) {
+TEST(ClientConnection, AHandlerMayClose) {
   Outcomes outcomes;
   Pair pair;
   pair.client->send(getAllReporters(), [&](Reply&&) { pair.client->close(); });
@@ -175,7 +179,7 @@ TEST(TarnReportingClient, AHandlerMayClose) {
   EXPECT_EQ(outcomes.heard(), Strings{"other cancelled"});
 }
 
-TEST(TarnReportingClient, TheEndOfTheConnectionIsTheReplyToKillService) {
+TEST(ClientConnection, TheEndOfTheConnectionIsTheReplyToKillService) {
   Outcomes outcomes;
   Pair pair;
   pair.client->send(getAllReporters(), outcomes.handler("other"));

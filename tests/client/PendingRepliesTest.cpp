@@ -25,7 +25,9 @@ class Line {
   std::vector<std::uint64_t> cancelled() {
     called_.clear();
     ReplyHandler handler;
-    while (pending_.takeCancelled(handler)) handler(Reply());
+    while (pending_.takeCancelled(handler)) {
+      handler(Reply());
+    }
     return called_;
   }
   PendingReplies& pending() { return pending_; }

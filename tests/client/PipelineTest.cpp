@@ -12,7 +12,7 @@ using testing::Pair;
 using testing::Served;
 using Strings = std::vector<std::string>;
 
-TEST(TarnReportingClient, SendsAreGatheredUntilFlushed) {
+TEST(ClientConnection, SendsAreGatheredUntilFlushed) {
   Pair pair;
   for (int i = 0; i < 10; ++i) {
     ASSERT_EQ(pair.client->send(getAllReporters()), SendStatus::Sent);
@@ -26,7 +26,7 @@ TEST(TarnReportingClient, SendsAreGatheredUntilFlushed) {
   }
 }
 
-TEST(TarnReportingClient, SendsAreWrittenOnceEnoughHasGathered) {
+TEST(ClientConnection, SendsAreWrittenOnceEnoughHasGathered) {
   Options options;
   options.autoFlushBytes = 20;
   Pair pair(options);
@@ -37,7 +37,7 @@ TEST(TarnReportingClient, SendsAreWrittenOnceEnoughHasGathered) {
   EXPECT_TRUE(pair.server->hasInput());
 }
 
-TEST(TarnReportingClient, ACallDeliversOtherRepliesOnTheWay) {
+TEST(ClientConnection, ACallDeliversOtherRepliesOnTheWay) {
   Outcomes outcomes;
   Pair pair;
   pair.client->send(createReportingSession(5), outcomes.handler("create"));
@@ -53,7 +53,7 @@ TEST(TarnReportingClient, ACallDeliversOtherRepliesOnTheWay) {
   EXPECT_EQ(outcomes.heard(), (Strings{"create ok", "start ok"}));
 }
 
-TEST(TarnReportingClient, AStartThatCanNeverBeAnsweredIsCancelled) {
+TEST(ClientConnection, AStartThatCanNeverBeAnsweredIsCancelled) {
   Outcomes outcomes;
   Pair pair;
   pair.client->send(createReportingSession(5));
@@ -72,7 +72,7 @@ TEST(TarnReportingClient, AStartThatCanNeverBeAnsweredIsCancelled) {
   EXPECT_EQ(outcomes.heard(), (Strings{"again cancelled", "start cancelled"}));
 }
 
-TEST(TarnReportingClient, ErrorsReachTheHandlerWithDomainCodeAndText) {
+TEST(ClientConnection, ErrorsReachTheHandlerWithDomainCodeAndText) {
   Pair pair;
   const Served serving([&] { pair.server->fail(pair.server->take()->id, 3, "no"); });
   const Reply reply = pair.client->call(setConfiguration({}, 5));
@@ -82,7 +82,7 @@ TEST(TarnReportingClient, ErrorsReachTheHandlerWithDomainCodeAndText) {
   EXPECT_EQ(reply.error.text, "no");
 }
 
-TEST(TarnReportingClient, ACallThatTimesOutDropsItsLateReply) {
+TEST(ClientConnection, ACallThatTimesOutDropsItsLateReply) {
   Pair pair;
   EXPECT_EQ(pair.client->call(getAllReporters(), std::chrono::milliseconds(1)).outcome, Outcome::TimedOut);
   pair.server->acknowledge(1);
@@ -92,7 +92,7 @@ TEST(TarnReportingClient, ACallThatTimesOutDropsItsLateReply) {
   EXPECT_EQ(pair.client->outstanding(), 0U);
 }
 
-TEST(TarnReportingClient, RepliesThatNobodyWaitsForAreCountedAndDropped) {
+TEST(ClientConnection, RepliesThatNobodyWaitsForAreCountedAndDropped) {
   Pair pair;
   pair.server->reply(77);
   pair.client->wait(std::chrono::seconds(5));
@@ -100,7 +100,7 @@ TEST(TarnReportingClient, RepliesThatNobodyWaitsForAreCountedAndDropped) {
   EXPECT_TRUE(pair.client->connected());
 }
 
-TEST(TarnReportingClient, ARequestOfTheLargestFrameIsSentAndOneByteMoreIsNot) {
+TEST(ClientConnection, ARequestOfTheLargestFrameIsSentAndOneByteMoreIsNot) {
   Options options;
   options.maxFrameBytes = 1000;
   Pair pair(options);
@@ -115,21 +115,25 @@ TEST(TarnReportingClient, ARequestOfTheLargestFrameIsSentAndOneByteMoreIsNot) {
   EXPECT_EQ(pair.server->take()->dictionary.get("k").text().size(), 990U);
 }
 
-TEST(TarnReportingClient, TrySendSaysFullInsteadOfWaiting) {
+TEST(ClientConnection, TrySendSaysFullInsteadOfWaiting) {
   Options options;
   options.maxOutgoingBytes = 100000;
   Pair pair(options);
   const Request large = setConfiguration({{"k", std::string(10000, 'x')}}, 1);
   std::size_t sent = 0;
-  while (pair.client->trySend(large) == SendStatus::Sent) ++sent;
+  while (pair.client->trySend(large) == SendStatus::Sent) {
+    ++sent;
+  }
   EXPECT_GE(sent, 10U);
   EXPECT_EQ(pair.client->outstanding(), sent);
   const Served serving([&] { pair.server->acknowledge(sent); });
-  while (pair.client->outstanding() > 0) pair.client->wait(std::chrono::seconds(5));
+  while (pair.client->outstanding() > 0) {
+    pair.client->wait(std::chrono::seconds(5));
+  }
   EXPECT_EQ(pair.client->trySend(large), SendStatus::Sent);
 }
 
-TEST(TarnReportingClient, SendWaitsUntilTheServiceHasTakenEnough) {
+TEST(ClientConnection, SendWaitsUntilTheServiceHasTakenEnough) {
   Options options;
   options.maxOutgoingBytes = 50000;
   Pair pair(options);
@@ -141,11 +145,13 @@ TEST(TarnReportingClient, SendWaitsUntilTheServiceHasTakenEnough) {
     ASSERT_EQ(pair.client->send(large, [&](Reply&& reply) { acknowledged += reply.ok() ? 1U : 0U; }), SendStatus::Sent);
   }
   pair.client->flush();
-  while (pair.client->outstanding() > 0) pair.client->wait(std::chrono::seconds(5));
+  while (pair.client->outstanding() > 0) {
+    pair.client->wait(std::chrono::seconds(5));
+  }
   EXPECT_EQ(acknowledged, kCount);
 }
 
-TEST(TarnReportingClient, TheNumberOfOutstandingRequestsIsBounded) {
+TEST(ClientConnection, TheNumberOfOutstandingRequestsIsBounded) {
   Options options;
   options.maxOutstanding = 3;
   Pair pair(options);
@@ -158,15 +164,19 @@ TEST(TarnReportingClient, TheNumberOfOutstandingRequestsIsBounded) {
   EXPECT_EQ(pair.client->outstanding(), 6U);
 }
 
-TEST(TarnReportingClient, AHandlerMaySendTheNextRequest) {
+TEST(ClientConnection, AHandlerMaySendTheNextRequest) {
   Pair pair;
   int rounds = 0;
   std::function<void(Reply &&)> next = [&](Reply&&) {
-    if (++rounds < 100) pair.client->send(getAllReporters(), next);
+    if (++rounds < 100) {
+      pair.client->send(getAllReporters(), next);
+    }
   };
   pair.client->send(getAllReporters(), next);
   const Served serving([&] { pair.server->acknowledge(100); });
-  while (rounds < 100) pair.client->wait(std::chrono::seconds(5));
+  while (rounds < 100) {
+    pair.client->wait(std::chrono::seconds(5));
+  }
   EXPECT_EQ(pair.client->outstanding(), 0U);
 }
 

@@ -33,8 +33,8 @@ TEST(Requests, OperationsOnOneSession) {
       {reporterID(-7), Operation::ReporterID}};
   for (const auto& [request, operation] : requests) {
     Pair pair;
-    const auto seen = requestOf(
-        pair, {true}, [&made = request](TarnReportingClient& client) { EXPECT_TRUE(client.call(made).ok()); });
+    const auto seen =
+        requestOf(pair, {true}, [&made = request](ClientConnection& client) { EXPECT_TRUE(client.call(made).ok()); });
     EXPECT_EQ(seen.operation, operation);
     EXPECT_EQ(seen.reporterID, -7);
   }
@@ -42,8 +42,8 @@ TEST(Requests, OperationsOnOneSession) {
 
 TEST(Requests, SetServiceType) {
   Pair pair;
-  const auto seen = requestOf(
-      pair, {true}, [](TarnReportingClient& client) { EXPECT_TRUE(client.call(setServiceType(11, 5)).ok()); });
+  const auto seen =
+      requestOf(pair, {true}, [](ClientConnection& client) { EXPECT_TRUE(client.call(setServiceType(11, 5)).ok()); });
   EXPECT_EQ(seen.operation, Operation::SetServiceType);
   EXPECT_EQ(seen.serviceType, 11);
   EXPECT_EQ(seen.reporterID, 5);
@@ -51,7 +51,7 @@ TEST(Requests, SetServiceType) {
 
 TEST(Requests, SetConfiguration) {
   Pair pair;
-  const auto seen = requestOf(pair, {true}, [](TarnReportingClient& client) {
+  const auto seen = requestOf(pair, {true}, [](ClientConnection& client) {
     EXPECT_TRUE(client.call(setConfiguration({{"a", 1}}, 5)).ok());
   });
   EXPECT_EQ(seen.operation, Operation::SetConfiguration);
@@ -60,7 +60,7 @@ TEST(Requests, SetConfiguration) {
 
 TEST(Requests, SendMessage) {
   Pair pair;
-  const auto seen = requestOf(pair, {}, [](TarnReportingClient& client) {
+  const auto seen = requestOf(pair, {}, [](ClientConnection& client) {
     EXPECT_TRUE(client.call(sendMessage({{"a", 1}}, 4, 2, std::vector<std::int64_t>{5, 6})).ok());
   });
   EXPECT_EQ(seen.operation, Operation::SendMessage);
@@ -71,15 +71,14 @@ TEST(Requests, SendMessage) {
 
 TEST(Requests, GetServiceNameAnswersANumber) {
   Pair pair;
-  requestOf(pair, {65535}, [](TarnReportingClient& client) {
-    EXPECT_EQ(client.call(getServiceNameForReporterID(5)).number(), 65535);
-  });
+  requestOf(pair, {65535},
+            [](ClientConnection& client) { EXPECT_EQ(client.call(getServiceNameForReporterID(5)).number(), 65535); });
 }
 
 TEST(Requests, GetAllReportersAnswersNumbers) {
   Pair pair;
   const plist::Array ids{5, -6};
-  const auto seen = requestOf(pair, {ids}, [](TarnReportingClient& client) {
+  const auto seen = requestOf(pair, {ids}, [](ClientConnection& client) {
     EXPECT_EQ(client.call(getAllReporters()).numbers(), (std::vector<std::int64_t>{5, -6}));
   });
   EXPECT_EQ(seen.operation, Operation::GetAllReporters);
@@ -89,7 +88,7 @@ TEST(Requests, StatusAnswersADictionary) {
   Pair pair;
   const plist::Dictionary counters{{"sessions", 3}};
   const auto seen = requestOf(
-      pair, {counters}, [&](TarnReportingClient& client) { EXPECT_EQ(client.call(status()).dictionary(), counters); });
+      pair, {counters}, [&](ClientConnection& client) { EXPECT_EQ(client.call(status()).dictionary(), counters); });
   EXPECT_EQ(seen.operation, Operation::Status);
 }
 
@@ -115,7 +114,7 @@ TEST(Requests, ResultsOfAnotherKindReadAsNothing) {
   EXPECT_TRUE(reply.numbers().empty());
 }
 
-TEST(TypedCalls, EveryOutcomeHasAName) {
+TEST(Reply, EveryOutcomeHasAName) {
   const std::vector<std::string_view> names{"ok",        "error", "cancelled", "connection lost",
                                             "timed out", "full",  "too large"};
   for (std::size_t at = 0; at < names.size(); ++at) {
@@ -124,7 +123,7 @@ TEST(TypedCalls, EveryOutcomeHasAName) {
   EXPECT_EQ(static_cast<std::size_t>(Outcome::TooLarge), names.size() - 1);
 }
 
-TEST(TypedCalls, ResultsReadAsWhatTheyAre) {
+TEST(Reply, ResultsReadAsWhatTheyAre) {
   Reply reply;
   reply.results.emplace_back(plist::Array{1, -2});
   EXPECT_EQ(reply.numbers(), (std::vector<std::int64_t>{1, -2}));

@@ -15,7 +15,7 @@
 #include <utility>
 #include <vector>
 
-#include "client/TarnReportingClient.h"
+#include "client/ClientConnection.h"
 #include "wire/Encoder.h"
 #include "wire/FrameBuffer.h"
 #include "wire/RequestDecoder.h"
@@ -40,7 +40,7 @@ class ScriptedServer {
     }
     wire::DecodedRequest request;
     wire::Refusal refusal;
-    if (decoder_.decode(frame, request, refusal) != wire::DecodeOutcome::Ok) return std::nullopt;
+    if (decoder_.decode(frame, request, refusal) != wire::DecodeVerdict::Ok) return std::nullopt;
     return request;
   }
 
@@ -77,7 +77,9 @@ class ScriptedServer {
   }
 
   void hangUp() {
-    if (fd_ >= 0) ::close(std::exchange(fd_, -1));
+    if (fd_ >= 0) {
+      ::close(std::exchange(fd_, -1));
+    }
   }
 
  private:
@@ -91,11 +93,11 @@ struct Pair {
   explicit Pair(const client::Options& options = {}) {
     int fds[2];
     if (::socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, fds) != 0) throw std::runtime_error("socketpair");
-    client = std::make_unique<client::TarnReportingClient>(client::Socket(fds[0]), options);
+    client = std::make_unique<client::ClientConnection>(client::Socket(fds[0]), options);
     server = std::make_unique<ScriptedServer>(fds[1]);
   }
 
-  std::unique_ptr<client::TarnReportingClient> client;
+  std::unique_ptr<client::ClientConnection> client;
   std::unique_ptr<ScriptedServer> server;
 };
 

@@ -12,7 +12,7 @@ namespace {
 using testing::Pair;
 using testing::Served;
 
-TEST(TarnReportingClientDeathTest, ACallInsideAHandlerEndsTheProcess) {
+TEST(ClientConnectionDeathTest, ACallInsideAHandlerEndsTheProcess) {
   GTEST_FLAG_SET(death_test_style, "threadsafe");
   EXPECT_DEATH(
       {
@@ -25,7 +25,7 @@ TEST(TarnReportingClientDeathTest, ACallInsideAHandlerEndsTheProcess) {
       "call inside a reply handler");
 }
 
-TEST(TarnReportingClientDeathTest, UseByTwoThreadsAtOnceEndsTheProcess) {
+TEST(ClientConnectionDeathTest, UseByTwoThreadsAtOnceEndsTheProcess) {
   GTEST_FLAG_SET(death_test_style, "threadsafe");
   EXPECT_DEATH(
       {
@@ -36,7 +36,7 @@ TEST(TarnReportingClientDeathTest, UseByTwoThreadsAtOnceEndsTheProcess) {
       "used by two threads at the same time");
 }
 
-TEST(TarnReportingClient, ThreadsMayUseOneClientInTurn) {
+TEST(ClientConnection, ThreadsMayUseOneClientInTurn) {
   Pair pair;
   constexpr std::size_t kThreads = 4;
   constexpr std::size_t kCalls = 200;
@@ -52,11 +52,13 @@ TEST(TarnReportingClient, ThreadsMayUseOneClientInTurn) {
       }
     });
   }
-  for (std::thread& thread : threads) thread.join();
+  for (std::thread& thread : threads) {
+    thread.join();
+  }
   EXPECT_EQ(good, kThreads * kCalls);
 }
 
-TEST(TarnReportingClient, ManyClientsOnTheirOwnThreadsDoNotMeet) {
+TEST(ClientConnection, ManyClientsOnTheirOwnThreadsDoNotMeet) {
   std::vector<std::thread> threads;
   std::atomic<std::size_t> good{0};
   for (int i = 0; i < 4; ++i) {
@@ -67,10 +69,14 @@ TEST(TarnReportingClient, ManyClientsOnTheirOwnThreadsDoNotMeet) {
         pair.client->send(sendMessage({{"volume", n}}, 4, 1), [&](Reply&& reply) { good += reply.ok() ? 1U : 0U; });
       }
       pair.client->flush();
-      while (pair.client->outstanding() > 0) pair.client->wait(std::chrono::seconds(5));
+      while (pair.client->outstanding() > 0) {
+        pair.client->wait(std::chrono::seconds(5));
+      }
     });
   }
-  for (std::thread& thread : threads) thread.join();
+  for (std::thread& thread : threads) {
+    thread.join();
+  }
   EXPECT_EQ(good, 2000U);
 }
 

@@ -167,9 +167,7 @@ class DerivationModel : public ::testing::Test {
         Stream stream = randomStream(keys);
         sent += stream.messages.size();
         derived += check(stream);
-        if (HasFatalFailure()) {
-          return;
-        }
+        if (HasFatalFailure()) return;
       }
       EXPECT_GT(derived, kMessagesPerRule / 100);  // the streams say something
     }

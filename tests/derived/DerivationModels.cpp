@@ -37,9 +37,7 @@ std::string text(const Value& value) {
 // Not a number is the same as not a number when both are numbers.
 bool numbersDiffer(const Value& a, const Value& b) {
   const bool bothNumbers = a.view().isNumber() && b.view().isNumber();
-  if (bothNumbers && std::isnan(number(a)) && std::isnan(number(b))) {
-    return false;
-  }
+  if (bothNumbers && std::isnan(number(a)) && std::isnan(number(b))) return false;
   return number(a) != number(b);
 }
 
@@ -122,13 +120,9 @@ Value segmentStart(const ModelPayloads& messages, const std::string& key, const 
                    const std::vector<bool>& running, const std::vector<bool>& cuts, std::size_t i,
                    const Value& carried) {
   while (i-- > 0) {
-    if (!running[i]) {
-      return Value();
-    }
+    if (!running[i]) return Value();
     const bool starts = isSet(messages[i], key) && !isSet(states[i], key);
-    if (cuts[i] || starts) {
-      return valueOf(messages[i], kTime);
-    }
+    if (cuts[i] || starts) return valueOf(messages[i], kTime);
   }
   return carried;
 }
@@ -163,9 +157,7 @@ std::vector<std::size_t> combineModel(ModelPayloads& messages, const std::vector
         filed = key;
       }
     }
-    if (!filed) {
-      continue;
-    }
+    if (!filed) continue;
     if (!seen.insert(*filed).second) {
       groups.emplace_back();
       seen = {*filed};
@@ -269,9 +261,7 @@ ModelPayloads inputModel(ModelPayloads& all, const ModelPayload& previous, const
   for (std::size_t i = 0; i < messages.size(); ++i) {
     const Value start = segmentStart(messages, "session_input_running", states, running, cuts, i, Value());
     const double length = number(valueOf(messages[i], kTime)) - number(start);
-    if (!cuts[i] || !has(messages[i], kTime) || !start.present() || !(length > kMinimum) || process.empty()) {
-      continue;
-    }
+    if (!cuts[i] || !has(messages[i], kTime) || !start.present() || !(length > kMinimum) || process.empty()) continue;
     std::set<std::string> codecs;
     for (; firstUnlisted <= i; ++firstUnlisted) {
       const std::string rate = text(valueOf(messages[firstUnlisted], "vp_config_primary_vocoderFs"));
@@ -339,9 +329,7 @@ ModelPayloads lagoonModel(const ModelPayloads& messages, const ModelPayload& pre
       watched |= both(key) && text(message.at(key)) != text(states[i].at(key));
     }
     const bool closes = hasEnd || (isSet(states[i], "session_output_running") && flag(states[i]) && watched);
-    if (!closes || !start.present()) {
-      continue;
-    }
+    if (!closes || !start.present()) continue;
     const double length = number(valueOf(message, kTime)) - number(start);
     if (length > kMinimum && flag(states[i])) {
       ModelPayload payload = defaults;

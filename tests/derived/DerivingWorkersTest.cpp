@@ -94,7 +94,7 @@ TEST_F(DerivingWorkers, LagoonMessagesReachEveryoneOnInternalBuilds) {
 }
 
 TEST_F(DerivingWorkers, OutputStillMarkedRunningAtTheStopCountsFromThePeriodsLastStamp) {
-  // The last values say "running, in a group, at that time", so the walk begins there and the end lies not behind it.
+  // The last values say "running, in a group, at that time", so the walk begins there and the end doesn't lie after it.
   const auto session = startSession<TarnReportingSessionLagoonMessagesWorker>();
   send(*session, {{"session_output_running", true}, {"lagoon_session", 1}});
   send(*session, {{"session_duration", 1}});

@@ -249,14 +249,14 @@ TEST_F(DPWorker, WaitsBeforeTheRequest) {
   platform_.conditions.onWait([&](Seconds) {
     EXPECT_EQ(gyres(), waits++);
     platform_.clock.advance(250ms);
-    return WaitOutcome::TimesOut;
+    return WaitEnd::TimesOut;
   });
   const double begin = now();
   const auto session = startedSession();
   sendOverload(*session, {{"smallest_buffer_frame_size", 512}});
   EXPECT_EQ(gyres(), 1U);
   EXPECT_EQ(platform_.conditions.timeouts(), (std::vector<Seconds>{250ms}));
-  // The ten seconds count from the overload, not from the request behind the wait.
+  // The ten seconds count from the overload, not from the request after the wait.
   platform_.clock.setEpochSeconds(begin + 10.125);
   sendOverload(*session, {{"smallest_buffer_frame_size", 513}});
   EXPECT_EQ(gyres(), 2U);
@@ -266,7 +266,7 @@ TEST_F(DPWorker, AWakeBeforeTheTimeWaitsForTheRest) {
   set("wait_time", 250000);
   platform_.conditions.onWait([this](Seconds) {
     platform_.clock.advance(100ms);
-    return WaitOutcome::Wakes;
+    return WaitEnd::Wakes;
   });
   EXPECT_EQ(gyresOf({{"smallest_buffer_frame_size", 512}}), 1U);
   EXPECT_EQ(platform_.conditions.timeouts(), (std::vector<Seconds>{250ms, 150ms, 50ms}));
@@ -373,7 +373,7 @@ TEST_F(DPWorker, AWaitThatEndsToTheNanosecondIsOver) {
   set("wait_time", 250000);
   platform_.conditions.onWait([this](Seconds) {
     platform_.clock.advance(125ms);
-    return WaitOutcome::Wakes;
+    return WaitEnd::Wakes;
   });
   EXPECT_EQ(gyresOf({{"smallest_buffer_frame_size", 512}}), 1U);
   EXPECT_EQ(platform_.conditions.timeouts(), (std::vector<Seconds>{250ms, 125ms}));

@@ -31,7 +31,7 @@ class MemoryLogWorker : public SessionFixture {
   void runToolsDuringWaits() {
     platform_.conditions.onWait([this](auto) {
       platform_.runUntilIdle();
-      return WaitOutcome::TimesOut;
+      return WaitEnd::TimesOut;
     });
   }
   static std::shared_ptr<TarnReportingSession> startedSession(AudioServiceType type = AudioServiceType::Test,
@@ -134,7 +134,7 @@ TEST_F(MemoryLogWorker, TheToolsRunOnQueuesOfTheirOwnAndBothBeforeTheWaitEnds) {
   platform_.conditions.onWait([&](auto) {
     waiting = platform_.workQueues.waiting();
     platform_.runUntilIdle();
-    return WaitOutcome::TimesOut;
+    return WaitEnd::TimesOut;
   });
   request(*startedSession());
   EXPECT_EQ(waiting, 2U);
@@ -186,7 +186,7 @@ TEST_F(MemoryLogWorker, AToolThatFailsSilentlyIsCapturedAndLeavesNoBlock) {
 }
 
 TEST_F(MemoryLogWorker, AToolThatCannotBeStartedIsTold) {
-  platform_.commandRunner.describe(kZones, {"never read", {}, platform::PlatformError{11, "no more processes"}});
+  platform_.commandRunner.describe(kZones, {"never read", {}, Error{11, "no more processes"}});
   describe(kResources, "RESOURCE\n");
   request(*startedSession());
   EXPECT_EQ(notes()[1], "wiredlog: unable to execute '/usr/bin/zonetally -l'");
@@ -284,7 +284,7 @@ TEST_F(MemoryLogWorker, WithoutANewlineBlocksAreOfFiveHundredAndTwelve) {
 
 TEST_F(MemoryLogWorker, ALongLineIsReadInPiecesEachWithItsTag) {
   const Strings found = blocksOf(kZones, std::string(2048, 'x') + "\n");
-  ASSERT_EQ(found.size(), 1U);  // the newline behind the second piece ends the first block
+  ASSERT_EQ(found.size(), 1U);  // the newline after the second piece ends the first block
   EXPECT_EQ(found[0], "WIRED LOG BLOCK 1\nwiredlog: " + std::string(2047, 'x') + "wiredlog: x\n");
 }
 
@@ -395,7 +395,7 @@ TEST_F(MemoryLogWorker, ToolsThatGetNoThreadAreGivenUpAndTheSessionStops) {
   platform_.conditions.onWait([this](std::chrono::duration<double> timeout) {
     EXPECT_LE(timeout, Worker::kPatience);
     platform_.clock.advance(80s);
-    return WaitOutcome::TimesOut;
+    return WaitEnd::TimesOut;
   });
   describe(kZones, "zone\n");
   auto session = startedSession();
@@ -417,7 +417,7 @@ TEST_F(MemoryLogWorker, AWakeWithoutAResultWaitsOn) {
     if (++waits == 3) {
       platform_.runUntilIdle();
     }
-    return WaitOutcome::Wakes;
+    return WaitEnd::Wakes;
   });
   describe(kZones, "zone\n");
   request(*startedSession());
@@ -425,7 +425,7 @@ TEST_F(MemoryLogWorker, AWakeWithoutAResultWaitsOn) {
   EXPECT_EQ(waits, 3);
 }
 
-// The blocks behind their heads, by number.
+// The blocks after their heads, by number.
 std::map<std::string, std::string> joined(const Strings& entries) {
   std::map<std::string, std::string> texts;
   for (const std::string& entry : entries) {
@@ -501,7 +501,7 @@ TEST_F(MemoryLogWorker, AWaitThatTimesOutIsNotRepeated) {
     if (++waits > 2) {
       platform_.clock.advance(80s);  // or it would wait for ever
     }
-    return WaitOutcome::TimesOut;
+    return WaitEnd::TimesOut;
   });
   request(*startedSession());
   EXPECT_EQ(waits, 2U);  // one for each tool
@@ -511,7 +511,7 @@ TEST_F(MemoryLogWorker, AWaitThatTimesOutIsNotRepeated) {
 TEST_F(MemoryLogWorker, WhenThePatienceIsOverToTheNanosecondNothingIsWaitedFor) {
   platform_.conditions.onWait([this](auto) {
     platform_.clock.advance(75s);
-    return WaitOutcome::Wakes;
+    return WaitEnd::Wakes;
   });
   request(*startedSession());
   EXPECT_EQ(platform_.conditions.timeouts().size(), 1U);

@@ -230,7 +230,7 @@ TEST_F(TattleWorker, AStoreThatTakesNothingLetsARunPromptOnce) {
 }
 
 TEST_F(TattleWorker, ARefusalIsLoggedOnceAndTheSessionStops) {
-  platform_.tattle.refuseWith(platform::PlatformError{5, "nobody is here"});
+  platform_.tattle.refuseWith(Error{5, "nobody is here"});
   const auto session = armedSession();
   sendError(*session, 6);
   session->stop();

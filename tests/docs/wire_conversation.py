@@ -53,7 +53,7 @@ def receive(connection, count):
     while len(received) < count:
         part = connection.recv(count - len(received))
         if not part:
-            raise SystemExit(f"the connection ended behind {received.hex(' ')}")
+            raise SystemExit(f"the connection ended after {received.hex(' ')}")
         received += part
     return received
 

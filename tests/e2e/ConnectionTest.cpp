@@ -77,7 +77,7 @@ TEST_F(Connections, ADisconnectEndsOneConnectionOfAScriptOnly) {
 }
 
 TEST_F(Connections, HundredsOfConnectionsCostNobodyTheirTurn) {
-  std::vector<std::unique_ptr<client::TarnReportingClient>> crowd;
+  std::vector<std::unique_ptr<client::ClientConnection>> crowd;
   for (int index = 0; index < 500; ++index) {
     crowd.push_back(connect());
     ASSERT_TRUE(crowd.back());

@@ -74,7 +74,7 @@ class DriverChannels : public ServiceFixture {
   }
 
   std::string folder_ = state() + "/flume";
-  std::unique_ptr<client::TarnReportingClient> client_;
+  std::unique_ptr<client::ClientConnection> client_;
 };
 
 TEST_F(DriverChannels, ASessionTellsWhatTheDriversCountedWhileItRan) {

@@ -17,9 +17,7 @@ namespace tarn::e2e {
 bool eventually(const std::function<bool()>& condition, std::chrono::milliseconds deadline) {
   const auto end = std::chrono::steady_clock::now() + deadline;
   while (!condition()) {
-    if (std::chrono::steady_clock::now() >= end) {
-      return false;
-    }
+    if (std::chrono::steady_clock::now() >= end) return false;
     std::this_thread::sleep_for(std::chrono::milliseconds(5));
   }
   return true;

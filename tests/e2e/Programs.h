@@ -12,7 +12,7 @@
 #include <string>
 #include <vector>
 
-#include "client/TarnReportingClient.h"
+#include "client/ClientConnection.h"
 
 namespace tarn::e2e {
 

@@ -36,9 +36,7 @@ class RawSocket {
   bool send(std::string_view bytes) {
     while (!bytes.empty()) {
       const ssize_t count = ::send(fd_, bytes.data(), bytes.size(), MSG_NOSIGNAL);
-      if (count <= 0) {
-        return false;
-      }
+      if (count <= 0) return false;
       bytes.remove_prefix(static_cast<std::size_t>(count));
     }
     return true;
@@ -47,9 +45,7 @@ class RawSocket {
   // The next frame's body; empty at the end of the connection or of the patience.
   std::string receiveFrame() {
     const std::string header = receiveBytes(4);
-    if (header.size() != 4) {
-      return {};
-    }
+    if (header.size() != 4) return {};
     std::uint32_t length = 0;
     for (std::size_t index = 0; index < 4; ++index) {
       length |= static_cast<std::uint32_t>(static_cast<unsigned char>(header[index])) << (8 * index);
@@ -86,9 +82,7 @@ class RawSocket {
     std::size_t have = 0;
     while (have < wanted) {
       const ssize_t count = ::recv(fd_, bytes.data() + have, wanted - have, 0);
-      if (count <= 0) {
-        return {};
-      }
+      if (count <= 0) return {};
       have += static_cast<std::size_t>(count);
     }
     return bytes;

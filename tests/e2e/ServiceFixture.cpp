@@ -26,8 +26,8 @@ bool ServiceFixture::startService(const std::vector<std::string>& options) {
   service_ = std::make_unique<Process>(serviceSetup(all), directory_);
   // The socket takes connections before the service is set up; only an answer tells that it is.
   const auto answers = [this] {
-    const auto connected = client::TarnReportingClient::connect(socket());
-    return !service_->isRunning() || (connected.client && connected.client->call(client::status(), kDeadline).ok());
+    const auto connected = client::ClientConnection::connect(socket());
+    return !service_->isRunning() || (connected.ok() && connected.value->call(client::status(), kDeadline).ok());
   };
   return eventually(answers) && service_->isRunning();
 }
@@ -67,10 +67,10 @@ std::vector<json> ServiceFixture::play(const std::string& script) {
   return jsonLines(played.output);
 }
 
-std::unique_ptr<client::TarnReportingClient> ServiceFixture::connect() {
-  auto connected = client::TarnReportingClient::connect(socket());
-  EXPECT_TRUE(connected.client) << connected.error;
-  return std::move(connected.client);
+std::unique_ptr<client::ClientConnection> ServiceFixture::connect() {
+  auto connected = client::ClientConnection::connect(socket());
+  EXPECT_TRUE(connected.ok()) << connected.error.text();
+  return std::move(connected.value);
 }
 
 std::vector<Event> ServiceFixture::events(const std::string& nameGlob) {
@@ -127,9 +127,7 @@ json ServiceFixture::ledgerAtRest() {
 
 json replyTo(const std::vector<json>& replies, std::size_t line) {
   for (const json& reply : replies) {
-    if (reply.at("line") == line) {
-      return reply;
-    }
+    if (reply.at("line") == line) return reply;
   }
   return {};
 }

@@ -44,7 +44,7 @@ class ServiceFixture : public ::testing::Test {
                                     int outputFd = -1);
   // Plays a script; its replies. Expects exit status 0.
   std::vector<json> play(const std::string& script);
-  std::unique_ptr<client::TarnReportingClient> connect();
+  std::unique_ptr<client::ClientConnection> connect();
 
   // What is committed by now.
   std::vector<Event> events(const std::string& nameGlob = "*");

@@ -131,7 +131,7 @@ class SettingsInASession : public ServiceFixture {
   }
 
   static constexpr const char* kSettings = "sys.oxbow.tarnkit.Setup.Setup";
-  std::unique_ptr<client::TarnReportingClient> client_;
+  std::unique_ptr<client::ClientConnection> client_;
 };
 
 TEST_F(SettingsInASession, AChangedDefaultArrivesAsExactlyOneMessage) {

@@ -75,7 +75,7 @@ class Snare : public ServiceFixture {
   static constexpr std::uint16_t kSystemSounds = 13;
   static constexpr const char* kInternal = R"({"InternalBuild": true, "haptics": true})";
 
-  std::unique_ptr<client::TarnReportingClient> client_;
+  std::unique_ptr<client::ClientConnection> client_;
 };
 
 TEST_F(Snare, LeakedHapticsOfTwoSessionsMakeASnapshot) {

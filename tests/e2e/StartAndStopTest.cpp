@@ -17,7 +17,7 @@ namespace {
 class StartAndStop : public ServiceFixture {
  protected:
   // A session that runs, with that many different messages, over a connection that stays open.
-  std::unique_ptr<client::TarnReportingClient> sendMessages(int count) {
+  std::unique_ptr<client::ClientConnection> sendMessages(int count) {
     auto client = connect();
     EXPECT_TRUE(client->call(client::createReportingSession(1)).ok());
     EXPECT_EQ(client->send(client::startReportingSessionForID(1)), client::SendStatus::Sent);

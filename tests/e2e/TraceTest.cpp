@@ -42,7 +42,9 @@ class Trace : public ServiceFixture {
     std::vector<fs::path> found;
     if (fs::exists(directory)) {
       for (const auto& entry : fs::directory_iterator(directory)) {
-        if (entry.path().extension() == extension) found.push_back(entry.path());
+        if (entry.path().extension() == extension) {
+          found.push_back(entry.path());
+        }
       }
     }
     return found;
@@ -54,7 +56,9 @@ class Trace : public ServiceFixture {
     for (const json& value : file.at("values")) {
       EXPECT_EQ(value.at("unit"), "ms");
       EXPECT_TRUE(value.at("value").is_number()) << value;
-      if (value.at("name") == name) values.push_back(value.at("value").get<double>());
+      if (value.at("name") == name) {
+        values.push_back(value.at("value").get<double>());
+      }
     }
     return values;
   }

@@ -43,12 +43,8 @@ class WireFaults : public ServiceFixture {
     wire::ReplyDecoder decoder;
     wire::DecodedReply reply;
     std::string reason;
-    if (frame.empty() || !decoder.decode(std::as_bytes(std::span(frame)), reply, reason)) {
-      return -1;
-    }
-    if (!reply.error) {
-      return 0;
-    }
+    if (frame.empty() || !decoder.decode(std::as_bytes(std::span(frame)), reply, reason)) return -1;
+    if (!reply.error) return 0;
     EXPECT_EQ(reply.error->domain, "sys.oxbow.audio.reporting.ipc");
     return reply.error->code;
   }
@@ -69,7 +65,7 @@ class WireFaults : public ServiceFixture {
     return count;
   }
 
-  std::unique_ptr<client::TarnReportingClient> bystander_;
+  std::unique_ptr<client::ClientConnection> bystander_;
 };
 
 TEST_F(WireFaults, AnUnknownOperationIsRefusedAndTheConnectionGoesOn) {

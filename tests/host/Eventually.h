@@ -11,9 +11,7 @@ template <class Condition>
 bool eventually(Condition condition, std::chrono::seconds patience = std::chrono::seconds(20)) {
   const auto deadline = std::chrono::steady_clock::now() + patience;
   while (!condition()) {
-    if (std::chrono::steady_clock::now() > deadline) {
-      return false;
-    }
+    if (std::chrono::steady_clock::now() > deadline) return false;
     ::poll(nullptr, 0, 1);
   }
   return true;

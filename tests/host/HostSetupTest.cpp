@@ -23,9 +23,9 @@ class HostSetupTest : public ::testing::Test {
   static int statusOf(const ServiceOptions& options, const std::string& complaint) {
     return testing::inChild([&] {
       HostSetup setup;
-      const std::optional<Refusal> refusal = setup.prepare(options);
-      if (!refusal) return setup.log && setup.socket && setup.signals ? 0 : 99;
-      return refusal->complaint == complaint ? refusal->exitStatus : 99;
+      const Status prepared = setup.prepare(options);
+      if (prepared.ok()) return setup.log && setup.socket && setup.signals ? 0 : 99;
+      return prepared->text == complaint ? static_cast<int>(prepared->code) : 99;
     });
   }
 

@@ -152,7 +152,9 @@ TEST(KeyList, AListTellsWhetherAnyKeyHasABlank) {
 
 TEST(KeyList, ALongListFindsItsKeysAndNoOthers) {
   std::vector<Key> keys;
-  for (int i = 0; i < 100; ++i) keys.emplace_back("long list " + std::to_string(i));
+  for (int i = 0; i < 100; ++i) {
+    keys.emplace_back("long list " + std::to_string(i));
+  }
   const auto list = KeyList::make(keys);
   ASSERT_TRUE(list.has_value());
   for (std::size_t i = 0; i < keys.size(); ++i) {

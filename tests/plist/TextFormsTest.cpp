@@ -10,7 +10,9 @@ namespace {
 std::string dateAndTime(double epochSeconds) {
   const auto date = calendarDate(epochSeconds);
   std::string text;
-  if (date) appendDateAndTime(text, *date, 'T');
+  if (date) {
+    appendDateAndTime(text, *date, 'T');
+  }
   return text;
 }
 

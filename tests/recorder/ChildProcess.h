@@ -21,7 +21,9 @@ class ChildProcess {
     }
   }
   ~ChildProcess() {
-    if (id_ > 0) killAndWait();
+    if (id_ > 0) {
+      killAndWait();
+    }
   }
   ChildProcess(const ChildProcess&) = delete;
   ChildProcess& operator=(const ChildProcess&) = delete;

@@ -26,9 +26,13 @@ class RecorderCrash : public RecorderFixture {
   void writeForEver() {
     start();
     for (std::uint64_t n = 0;; ++n) {
-      while (recorder_->isFull()) std::this_thread::sleep_for(std::chrono::microseconds(100));
+      while (recorder_->isFull()) {
+        std::this_thread::sleep_for(std::chrono::microseconds(100));
+      }
       record("event" + std::to_string(n), {{"n", n}});
-      if (n % 64 == 0) shared_->committed = recorder_->counters().committed;
+      if (n % 64 == 0) {
+        shared_->committed = recorder_->counters().committed;
+      }
     }
   }
 

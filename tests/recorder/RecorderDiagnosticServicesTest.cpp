@@ -23,7 +23,7 @@ class RecorderTattleServiceTest : public RecorderFixture {
   }
   // A completion that counts its calls and keeps the last error.
   platform::TattleService::Completion completion() {
-    return [this](const platform::MaybeError& error) {
+    return [this](const Status& error) {
       ++completions_;
       error_ = error;
     };
@@ -31,7 +31,7 @@ class RecorderTattleServiceTest : public RecorderFixture {
 
   ManualWorkQueues workQueues_{clock_};
   int completions_ = 0;
-  platform::MaybeError error_ = platform::PlatformError{1, "not called"};
+  Status error_ = Error{1, "not called"};
 };
 
 TEST_F(RecorderTattleServiceTest, RecordsTheDraftWithItsProcessAndReason) {
@@ -62,7 +62,7 @@ TEST_F(RecorderTattleServiceTest, CompletesOnceOnAQueueOfItsOwnBehindTheCall) {
   EXPECT_EQ(workQueues_.names().size(), 1U);
   workQueues_.runUntilIdle();
   EXPECT_EQ(completions_, 2);
-  EXPECT_FALSE(error_);
+  EXPECT_TRUE(error_.ok());
 }
 
 TEST_F(RecorderTattleServiceTest, CompletesThoughTheServiceIsGone) {

@@ -51,7 +51,9 @@ class RecorderFault : public RecorderFixture {
   }
   static void TearDownTestSuite() {
     sqlite3_vfs* const files = sqlite3_vfs_find("unix");
-    for (const char* const name : {"pwrite", "pwrite64", "write"}) files->xSetSystemCall(files, name, nullptr);
+    for (const char* const name : {"pwrite", "pwrite64", "write"}) {
+      files->xSetSystemCall(files, name, nullptr);
+    }
   }
   void TearDown() override {
     heal();

@@ -72,7 +72,9 @@ inline std::vector<std::string> ask(const std::filesystem::path& file, const std
     };
     code = sqlite3_exec(database, sql.c_str(), addRow, &rows, nullptr);
   }
-  if (code != SQLITE_OK) rows = {std::string("failed: ") + sqlite3_errmsg(database)};
+  if (code != SQLITE_OK) {
+    rows = {std::string("failed: ") + sqlite3_errmsg(database)};
+  }
   sqlite3_close(database);
   return rows;
 }
@@ -113,7 +115,9 @@ class RecorderFixture : public ::testing::Test {
     recorder_->record("tally", name, payload, {}, clock_.epochSeconds());
   }
   void recordMany(int count, std::size_t payloadBytes = 10) {
-    for (int i = 0; i < count; ++i) record("event" + std::to_string(i), {{"text", std::string(payloadBytes, 'x')}});
+    for (int i = 0; i < count; ++i) {
+      record("event" + std::to_string(i), {{"text", std::string(payloadBytes, 'x')}});
+    }
   }
   bool flush() { return recorder_->flush(kPatience); }
   std::size_t errors() const { return log_.entries(platform::LogLevel::Error).size(); }
@@ -122,7 +126,9 @@ class RecorderFixture : public ::testing::Test {
     for (const auto& entry : std::filesystem::directory_iterator(directory_.path())) {
       const std::string name = entry.path().filename().string();
       const bool companion = name.ends_with("-wal") || name.ends_with("-shm");
-      if (name.find(".damaged-") != std::string::npos && !companion) aside.push_back(entry.path());
+      if (name.find(".damaged-") != std::string::npos && !companion) {
+        aside.push_back(entry.path());
+      }
     }
     return aside;
   }

@@ -30,7 +30,9 @@ TEST_F(RecorderPylonServiceTest, RecordsIdentifierFieldsAndBytes) {
 TEST_F(RecorderPylonServiceTest, EveryByteIsTwoLowerCaseDigits) {
   RecorderPylonService service(start(), clock_);
   std::string bytes;
-  for (int byte = 0; byte < 256; ++byte) bytes += static_cast<char>(static_cast<unsigned char>(byte));
+  for (int byte = 0; byte < 256; ++byte) {
+    bytes += static_cast<char>(static_cast<unsigned char>(byte));
+  }
   service.post(0xffffffff, FixedRecord(bytes, {}));
   service.post(0, FixedRecord("", {}));
   ASSERT_TRUE(flush());

@@ -42,7 +42,7 @@ TEST_F(RecorderRtcReportingServiceTest, RecordsASessionItsMessagesAndItsFlushes)
   const auto session = service->createSession({{"clientType", 19}, {"clientVersion", 2.1F}}, {{"clientName", "x"}}, {});
   const auto result = session->sendMessage(0xFFFF, 7, {{"n", 1}});
   EXPECT_TRUE(result.sent);
-  EXPECT_FALSE(result.error);
+  EXPECT_TRUE(result.error.ok());
   session->flushMessages();
   EXPECT_EQ(rows(), (std::vector<std::string>{
                         R"(1763632800.5|rtc|createSession|{"sessionInfo":{"clientType":19,"clientVersion":2.1},)"
@@ -129,10 +129,14 @@ TEST_F(RecorderRtcReportingServiceTest, SessionMayBeUsedFromAnyThread) {
     threads.emplace_back([&] {
       const auto session = makeSession(*service);
       static_cast<void>(backendsOf(*session));
-      for (int i = 0; i < 200; ++i) EXPECT_TRUE(session->sendMessage(1, 1, {{"n", i}}).sent);
+      for (int i = 0; i < 200; ++i) {
+        EXPECT_TRUE(session->sendMessage(1, 1, {{"n", i}}).sent);
+      }
     });
   }
-  for (auto& thread : threads) thread.join();
+  for (auto& thread : threads) {
+    thread.join();
+  }
   ASSERT_TRUE(flush());
   EXPECT_EQ(ask(file(),
                 "SELECT detail ->> 'session', count(*), max(payload ->> 'n') FROM events "

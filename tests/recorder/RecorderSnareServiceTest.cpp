@@ -245,7 +245,9 @@ TEST_F(RecorderSnareServiceTest, TakesRequestsOfManyThreads) {
       }
     });
   }
-  for (std::thread& thread : threads) thread.join();
+  for (std::thread& thread : threads) {
+    thread.join();
+  }
   EXPECT_EQ(replies_.once(kThreads * kEach).size(), std::size_t{kThreads * kEach});
   EXPECT_EQ(rows("1").size(), std::size_t{2 * kThreads * kEach});
 }

@@ -22,7 +22,9 @@ TEST_F(RecorderStress, TheAccountIsRightAtAnyMomentAndNothingIsLost) {
     writers.emplace_back([this, t] {
       const Dictionary payload{{"thread", t}};
       for (int i = 0; i < kEvents; ++i) {
-        while (recorder_->isFull()) std::this_thread::sleep_for(std::chrono::microseconds(100));
+        while (recorder_->isFull()) {
+          std::this_thread::sleep_for(std::chrono::microseconds(100));
+        }
         recorder_->record("tally", std::to_string(t), payload, {{"i", i}}, clock_.epochSeconds());
       }
     });
@@ -40,7 +42,9 @@ TEST_F(RecorderStress, TheAccountIsRightAtAnyMomentAndNothingIsLost) {
     }
   });
   std::thread flusher([this, &done] {
-    while (!done) ASSERT_TRUE(flush());
+    while (!done) {
+      ASSERT_TRUE(flush());
+    }
   });
   std::thread reader([this, &done] {
     EventReader events(file());
@@ -49,12 +53,18 @@ TEST_F(RecorderStress, TheAccountIsRightAtAnyMomentAndNothingIsLost) {
     while (!done || seen < std::size_t{kThreads} * kEvents) {
       const EventReader::Result result = events.read(query);
       ASSERT_NE(result.status, EventReader::Status::Failed) << result.error;
-      for (const EventRow& row : result.rows) ASSERT_EQ(row.id, static_cast<std::int64_t>(++seen));
+      for (const EventRow& row : result.rows) {
+        ASSERT_EQ(row.id, static_cast<std::int64_t>(++seen));
+      }
       query.after = result.lookedUpTo;
-      if (result.rows.empty()) events.waitForChange(std::chrono::milliseconds(50));
+      if (result.rows.empty()) {
+        events.waitForChange(std::chrono::milliseconds(50));
+      }
     }
   });
-  for (std::thread& writer : writers) writer.join();
+  for (std::thread& writer : writers) {
+    writer.join();
+  }
   const bool flushed = flush();
   done = true;
   accountant.join();
@@ -74,7 +84,9 @@ TEST_F(RecorderStress, ShutdownDuringAHailOfEventsKeepsTheAccount) {
   std::thread writer([this, &done] {
     while (!done) {
       record("a", {{"n", 1}});
-      if (recorder_->isFull()) std::this_thread::yield();
+      if (recorder_->isFull()) {
+        std::this_thread::yield();
+      }
     }
   });
   ASSERT_TRUE(eventually([&] { return recorder_->counters().committed > 0; }));

@@ -158,7 +158,9 @@ class RecorderSettle : public RecorderFixture {
     Guard(Guard&& other) noexcept : test(std::exchange(other.test, nullptr)) {}
     Guard& operator=(Guard&&) = delete;
     ~Guard() {
-      if (test != nullptr) ++test->destroyed_;
+      if (test != nullptr) {
+        ++test->destroyed_;
+      }
     }
     RecorderSettle* test;
   };
@@ -294,7 +296,9 @@ TEST_F(RecorderTest, ReadersSeeCommittedEventsWhileMoreAreWritten) {
   ASSERT_TRUE(flush());
   std::atomic<bool> done{false};
   std::thread writer([&] {
-    for (int i = 0; i < 200; ++i) recordMany(20);
+    for (int i = 0; i < 200; ++i) {
+      recordMany(20);
+    }
     done = true;
   });
   long last = 100;

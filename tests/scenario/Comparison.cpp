@@ -68,7 +68,9 @@ void Comparison::place(const RecordedEvent& event) {
   }
   skipTo(*best, best->next + fewest);
   matches_.push_back(best->lines[best->next++]);
-  if (event.backend == kMirrors) best->session = event.detail.value("session", json());
+  if (event.backend == kMirrors) {
+    best->session = event.detail.value("session", json());
+  }
 }
 
 bool Comparison::mayHold(const Lane& lane, const RecordedEvent& event) const {

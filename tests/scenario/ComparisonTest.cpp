@@ -9,7 +9,9 @@ namespace {
 class ScenarioComparison : public ScenarioFixture {
  protected:
   void expects(const std::string& name, const std::string& lines) {
-    for (const ExpectedEvent& line : beside(name, lines)) lines_.push_back(line);
+    for (const ExpectedEvent& line : beside(name, lines)) {
+      lines_.push_back(line);
+    }
   }
   Differences differences() {
     Comparison comparison(lines_, playing_);
@@ -96,7 +98,9 @@ TEST_F(ScenarioComparison, FindsAStampThatIsNotOfTheTimeOfPlaying) {
 TEST_F(ScenarioComparison, ScriptsMixAndEachKeepsItsOrder) {
   expects("a", R"({"backend":"wattlog","name":["A1","A2"],"payload":{}})");
   expects("b", R"({"backend":"wattlog","name":["B1","B2"],"payload":{}})");
-  for (const char* name : {"B1", "A1", "B2", "A2"}) arrives("wattlog", name);
+  for (const char* name : {"B1", "A1", "B2", "A2"}) {
+    arrives("wattlog", name);
+  }
   EXPECT_EQ(differences(), Differences{});
   std::swap(events_[0], events_[2]);
   EXPECT_NE(differences(), Differences{});
@@ -141,7 +145,9 @@ TEST_F(ScenarioComparison, FindsAMirroredSessionThatNobodyExpects) {
 }
 
 TEST_F(ScenarioComparison, ScriptsWithoutDifferenceMayEndInAnyOrder) {
-  for (const char* name : {"a", "b"}) expects(name, R"({"backend":"tally","name":["uptime"],"payload":{"seconds":0}})");
+  for (const char* name : {"a", "b"}) {
+    expects(name, R"({"backend":"tally","name":["uptime"],"payload":{"seconds":0}})");
+  }
   arrives("tally", "uptime", {{"seconds", 0}});
   EXPECT_EQ(differences().size(), 1U);
   arrives("tally", "uptime", {{"seconds", 0}});

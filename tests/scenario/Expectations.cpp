@@ -45,7 +45,9 @@ std::string lineOf(const ExpectedEvent& event, const json& names) {
   line["backend"] = event.backend;
   line["name"] = names.size() == 1 ? names.front() : names;
   line["payload"] = event.payload;
-  if (!event.detail.empty()) line["detail"] = event.detail;
+  if (!event.detail.empty()) {
+    line["detail"] = event.detail;
+  }
   return line.dump();
 }
 
@@ -95,7 +97,9 @@ void writeExpectations(const std::string& script, const std::vector<ExpectedEven
     for (auto event = lane.begin(); event != lane.end();) {
       const ExpectedEvent& first = *event;
       json names = json::array();
-      for (; event != lane.end() && areAlike(first, *event); ++event) names.push_back(event->name);
+      for (; event != lane.end() && areAlike(first, *event); ++event) {
+        names.push_back(event->name);
+      }
       file << lineOf(first, names) << '\n';
     }
   }

@@ -168,10 +168,14 @@ json asExpectation(const json& found, const Playing& playing) {
 
 void checkNotation(const json& expected) {
   if (expected.is_structured()) {
-    for (const json& inner : expected) checkNotation(inner);
+    for (const json& inner : expected) {
+      checkNotation(inner);
+    }
   } else if (expected.is_string()) {
     for (const std::string& part : partsOf(expected.get<std::string>(), ',')) {
-      if (isNotation(part)) holds(inside(part), json(), {});
+      if (isNotation(part)) {
+        holds(inside(part), json(), {});
+      }
     }
   }
 }

@@ -26,7 +26,9 @@ TEST(ScenarioNotation, ValuesMustBeEqual) {
 }
 
 TEST(ScenarioNotation, NowIsTheTimeOfPlaying) {
-  for (const double inside : {999.0, 1000.0, 1005.5, 1011.0}) EXPECT_TRUE(matches("<now>", inside)) << inside;
+  for (const double inside : {999.0, 1000.0, 1005.5, 1011.0}) {
+    EXPECT_TRUE(matches("<now>", inside)) << inside;
+  }
   for (const json& outside : {json(998.9), json(1011.1), json("1005"), json(true)}) {
     EXPECT_FALSE(matches("<now>", outside)) << outside;
   }

@@ -53,7 +53,9 @@ std::vector<RecordedEvent> summaryFiles(const std::string& stateDirectory) {
   const std::filesystem::path directory = stateDirectory + "/DiagnosticLogs/Audio/Reporting";
   std::vector<std::filesystem::path> paths;
   if (std::filesystem::exists(directory)) {
-    for (const auto& entry : std::filesystem::directory_iterator(directory)) paths.push_back(entry.path());
+    for (const auto& entry : std::filesystem::directory_iterator(directory)) {
+      paths.push_back(entry.path());
+    }
   }
   std::sort(paths.begin(), paths.end(), [](const auto& one, const auto& other) { return one.stem() < other.stem(); });
   std::vector<RecordedEvent> files;
@@ -85,17 +87,19 @@ std::vector<RecordedEvent> repliesTo(const std::string& script, const std::strin
           error.is_null() ? json{{"result", reply.at("result")}} : json{{"error", error}}, json::object(), script}});
   }
   std::vector<RecordedEvent> ordered;
-  for (const auto& [line, reply] : replies) ordered.push_back(reply);
+  for (const auto& [line, reply] : replies) {
+    ordered.push_back(reply);
+  }
   return ordered;
 }
 
 ServiceWatch::ServiceWatch(const std::string& socket, double patienceSeconds) {
   const auto deadline = deadlineIn(patienceSeconds);
   while (!client_) {
-    auto connected = client::TarnReportingClient::connect(socket);
-    client_ = std::move(connected.client);
+    auto connected = client::ClientConnection::connect(socket);
+    client_ = std::move(connected.value);
     if (!client_ && Clock::now() > deadline) {
-      throw std::runtime_error("the service can't be reached: " + connected.error);
+      throw std::runtime_error("the service can't be reached: " + connected.error->text);
     }
     if (!client_) {
       std::this_thread::sleep_for(kPause);
@@ -107,9 +111,7 @@ json ServiceWatch::ledgerAtRest(double patienceSeconds, std::size_t leastEvents)
   const auto deadline = deadlineIn(patienceSeconds);
   while (true) {
     const client::Reply reply = client_->call(client::status());
-    if (!reply.ok()) {
-      throw std::runtime_error("the service doesn't tell its status: " + reply.error.text);
-    }
+    if (!reply.ok()) throw std::runtime_error("the service doesn't tell its status: " + reply.error.text);
     std::string text;
     plist::appendJson(text, reply.dictionary());
     json ledger = json::parse(text);
@@ -118,9 +120,7 @@ json ServiceWatch::ledgerAtRest(double patienceSeconds, std::size_t leastEvents)
     if (isAtRest && (ledger.value("recorder_committed", std::size_t{0}) >= leastEvents || Clock::now() > deadline)) {
       return ledger;
     }
-    if (Clock::now() > deadline) {
-      throw std::runtime_error("the service doesn't come to rest: " + ledger.dump());
-    }
+    if (Clock::now() > deadline) throw std::runtime_error("the service doesn't come to rest: " + ledger.dump());
     std::this_thread::sleep_for(kPause);
   }
 }

@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-#include "client/TarnReportingClient.h"
+#include "client/ClientConnection.h"
 
 namespace tarn::scenario {
 
@@ -26,7 +26,7 @@ struct RecordedEvent {
   std::string script{};  // that led to it; empty when that isn't known
 };
 
-// All events of the recorder behind number `after`, in the order of hand-over. Throws std::runtime_error.
+// All events of the recorder after number `after`, in the order of hand-over. Throws std::runtime_error.
 std::vector<RecordedEvent> recordedEvents(const std::string& stateDirectory, std::int64_t after = 0);
 // The summary files below the service's state directory; those of one session are in the order of its stops. Time and
 // number aren't in the name; that of a file that is not named as it must be is left as it is.
@@ -47,7 +47,7 @@ class ServiceWatch {
   json ledgerAtRest(double patienceSeconds, std::size_t leastEvents = 0);
 
  private:
-  std::unique_ptr<client::TarnReportingClient> client_;
+  std::unique_ptr<client::ClientConnection> client_;
 };
 
 }  // namespace tarn::scenario

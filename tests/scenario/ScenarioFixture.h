@@ -30,7 +30,9 @@ class ScenarioFixture : public ::testing::Test {
  protected:
   ScenarioFixture() {
     std::string name = (std::filesystem::temp_directory_path() / "tarnscenario.XXXXXX").string();
-    if (::mkdtemp(name.data()) != nullptr) directory_ = name;
+    if (::mkdtemp(name.data()) != nullptr) {
+      directory_ = name;
+    }
   }
 
   std::string script(const std::string& name) const { return directory_ + "/" + name + ".jsonl"; }

@@ -14,13 +14,17 @@ namespace {
 class SessionNames {
  public:
   explicit SessionNames(const std::vector<ExpectedEvent>& old) {
-    for (const ExpectedEvent& line : old) taken_.insert(line.detail.value("session", json()));
+    for (const ExpectedEvent& line : old) {
+      taken_.insert(line.detail.value("session", json()));
+    }
   }
   const json& nameOf(const json& session) {
     json& name = names_[session];
     for (int number = 1; name.is_null(); ++number) {
       const json candidate = "<session " + std::to_string(number) + ">";
-      if (taken_.insert(candidate).second) name = candidate;
+      if (taken_.insert(candidate).second) {
+        name = candidate;
+      }
     }
     return name;
   }

@@ -8,8 +8,8 @@
 #include <iostream>
 #include <stdexcept>
 
-#include "tests/scenario/Account.h"
 #include "tests/scenario/Comparison.h"
+#include "tests/scenario/PassReport.h"
 #include "tests/scenario/ScriptPlayer.h"
 #include "tests/scenario/Update.h"
 
@@ -96,7 +96,9 @@ int check(const Options& options) {
   std::vector<RecordedEvent> events = recordedEvents(options.service.stateDirectory);
   const std::size_t recorded = events.size();
   append(events, summaryFiles(options.service.stateDirectory));
-  for (const std::string& script : scriptsOf(options)) append(events, player.replies(script));
+  for (const std::string& script : scriptsOf(options)) {
+    append(events, player.replies(script));
+  }
   events = withoutDirectory(std::move(events), options.directory);
   Comparison comparison(expected, playing);
   comparison.compare(events);
@@ -104,9 +106,11 @@ int check(const Options& options) {
   const auto& differences = comparison.differences();
   succeeded = succeeded && differences.empty();
   const std::string summary = summaryOf(options, succeeded, differences.size(), recorded, playing);
-  if (!options.details.empty()) writeDetails(options.details, summary, differences, events, comparison.matches());
+  if (!options.details.empty()) {
+    writeDetails(options.details, summary, differences, events, comparison.matches());
+  }
   printDifferences(differences);
-  printAccount(summary, events);
+  printPassReport(summary, events);
   return succeeded ? EXIT_SUCCESS : EXIT_FAILURE;
 }
 
@@ -132,7 +136,9 @@ int update(const Options& options) {
       });
     });
     earlierFiles = files;
-    for (RecordedEvent& event : events) event.script = fileName(script);
+    for (RecordedEvent& event : events) {
+      event.script = fileName(script);
+    }
     append(events, player.replies(script));
     events = withoutDirectory(std::move(events), options.directory);
     writeExpectations(script, updated(readExpectations(script), events, playing));

@@ -98,9 +98,7 @@ class Model {
   }
 
   bool isRedundant(const Payload& payload, AudioEventCategory category, AudioEventType type) const {
-    if (type == AudioEventType::Error || category == AudioEventCategory::Error) {
-      return false;
-    }
+    if (type == AudioEventType::Error || category == AudioEventCategory::Error) return false;
     for (auto record = log.rbegin(); record != log.rend(); ++record) {
       if (record->type == type && record->category == category) {
         return comparable(record->payload) == comparable(payload);

@@ -10,7 +10,9 @@ namespace {
 class Seeds : public ::testing::Test {
  protected:
   Seeds() {
-    if (const char* const value = std::getenv(kSeedVariable)) before_ = value;
+    if (const char* const value = std::getenv(kSeedVariable)) {
+      before_ = value;
+    }
     ::unsetenv(kSeedVariable);
   }
   ~Seeds() override {

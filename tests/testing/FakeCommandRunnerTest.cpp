@@ -45,7 +45,7 @@ TEST(FakeCommandRunner, AHangingCommandGivesWhatItPrintedAndTimesOut) {
 
 TEST(FakeCommandRunner, ARefusedCommandDoesNotRun) {
   FakeCommandRunner runner;
-  runner.describe("tool", {"", {}, platform::PlatformError{11, "no more processes"}});
+  runner.describe("tool", {"", {}, Error{11, "no more processes"}});
 
   const auto started = runner.start("tool", 60s);
 

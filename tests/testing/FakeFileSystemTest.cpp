@@ -9,22 +9,22 @@ using Operation = FakeFileSystem::Operation;
 
 TEST(FakeFileSystem, AFileNeedsItsDirectory) {
   FakeFileSystem files;
-  ASSERT_TRUE(files.createFile("/a/b/file"));
+  ASSERT_TRUE(files.createFile("/a/b/file").failed());
 
-  ASSERT_FALSE(files.createDirectories("/a/b", 0777));
+  ASSERT_TRUE(files.createDirectories("/a/b", 0777).ok());
 
-  EXPECT_FALSE(files.createFile("/a/b/file"));
+  EXPECT_TRUE(files.createFile("/a/b/file").ok());
   EXPECT_EQ(files.directoryPermissions("/a"), 0777U);
   EXPECT_EQ(files.content("/a/b/file"), "");
 }
 
 TEST(FakeFileSystem, AFileIsCreatedOnce) {
   FakeFileSystem files;
-  ASSERT_FALSE(files.createFile("/file"));
+  ASSERT_TRUE(files.createFile("/file").ok());
 
   const auto again = files.createFile("/file");
 
-  ASSERT_TRUE(again);
+  ASSERT_TRUE(again.failed());
   EXPECT_EQ(again->text, "File exists");
 }
 
@@ -35,9 +35,9 @@ TEST(FakeFileSystem, WritesAreSeenAndTheCloseIsCounted) {
   ASSERT_FALSE(opened.failed());
   EXPECT_EQ(files.openFiles(), 1U);
 
-  EXPECT_FALSE(opened.value->write("new"));
+  EXPECT_TRUE(opened.value->write("new").ok());
   EXPECT_EQ(files.content("/logs/file"), "new");
-  EXPECT_FALSE(opened.value->close());
+  EXPECT_TRUE(opened.value->close().ok());
 
   EXPECT_EQ(files.openFiles(), 0U);
   EXPECT_EQ(opened.value->close()->text, "Bad file descriptor");
@@ -51,7 +51,7 @@ TEST(FakeFileSystem, AnOpenFileMayOutliveTheFileSystem) {
     file = files.openForWriting("/file").value;
   }
 
-  EXPECT_FALSE(file->write("late"));
+  EXPECT_TRUE(file->write("late").ok());
 }
 
 TEST(FakeFileSystem, AnOrderedFailureComesOnceAfterTheSkippedCalls) {
@@ -60,11 +60,11 @@ TEST(FakeFileSystem, AnOrderedFailureComesOnceAfterTheSkippedCalls) {
   auto opened = files.openForWriting("/file");
   files.failNext(Operation::Write, {5, "Input/output error"}, 1);
 
-  EXPECT_FALSE(opened.value->write("a"));
+  EXPECT_TRUE(opened.value->write("a").ok());
   const auto failed = opened.value->write("b");
-  EXPECT_FALSE(opened.value->write("c"));
+  EXPECT_TRUE(opened.value->write("c").ok());
 
-  ASSERT_TRUE(failed);
+  ASSERT_TRUE(failed.failed());
   EXPECT_EQ(failed->code, 5);
   EXPECT_EQ(files.content("/file"), "ac");
 }
@@ -75,10 +75,10 @@ TEST(FakeFileSystem, AFullDiskKeepsWhatFits) {
   auto opened = files.openForWriting("/file");
   files.setFreeBytes(5);
 
-  EXPECT_FALSE(opened.value->write("123"));
+  EXPECT_TRUE(opened.value->write("123").ok());
   const auto failed = opened.value->write("456");
 
-  ASSERT_TRUE(failed);
+  ASSERT_TRUE(failed.failed());
   EXPECT_EQ(failed->code, 28);
   EXPECT_EQ(files.content("/file"), "12345");
 }
@@ -97,11 +97,11 @@ TEST(FakeFileSystem, MovesAndReplaces) {
   files.putFile("/from", "new");
   files.putFile("/to", "old");
 
-  EXPECT_FALSE(files.moveFile("/from", "/to"));
+  EXPECT_TRUE(files.moveFile("/from", "/to").ok());
 
   EXPECT_EQ(files.files(), std::vector<std::string>{"/to"});
   EXPECT_EQ(files.content("/to"), "new");
-  EXPECT_TRUE(files.moveFile("/from", "/to"));
+  EXPECT_TRUE(files.moveFile("/from", "/to").failed());
 }
 
 }  // namespace

@@ -131,7 +131,7 @@ TEST(FakeFlumeService, AStepFailsWithACodeOrWithNothing) {
   EXPECT_EQ(channels.value, nullptr);
   EXPECT_EQ(channels.error->code, -536870206);
   EXPECT_EQ(subscribed.subscription, nullptr);
-  EXPECT_FALSE(subscribed.error);
+  EXPECT_TRUE(subscribed.error.ok());
   EXPECT_EQ(service.calls(Step::CopyChannels), 1U);
   service.restore(Step::CopyChannels);
   EXPECT_FALSE(service.copyChannels("Haptics", {}).failed());

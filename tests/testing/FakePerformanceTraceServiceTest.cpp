@@ -5,21 +5,19 @@
 namespace tarn::testing {
 namespace {
 
-using platform::MaybeError;
-
 class Delegate final : public platform::PerformanceTraceDelegate {
  public:
-  void performanceTraceDidStart(const MaybeError& error) override { note("start", error); }
-  void performanceTraceDidStop(const MaybeError& error) override { note("stop", error); }
-  void performanceTraceDidComplete(const std::string& location, const std::string&, const MaybeError& error) override {
+  void performanceTraceDidStart(const Status& error) override { note("start", error); }
+  void performanceTraceDidStop(const Status& error) override { note("stop", error); }
+  void performanceTraceDidComplete(const std::string& location, const std::string&, const Status& error) override {
     note("complete " + location, error);
   }
 
   std::vector<std::string> calls;
 
  private:
-  void note(const std::string& name, const MaybeError& error) {
-    calls.push_back(error ? name + ": " + error->text : name);
+  void note(const std::string& name, const Status& error) {
+    calls.push_back(error.failed() ? name + ": " + error->text : name);
   }
 };
 
@@ -50,7 +48,7 @@ TEST_F(FakePerformanceTraceServiceTest, ATraceRunsFromStartToCompletion) {
 }
 
 TEST_F(FakePerformanceTraceServiceTest, NothingFollowsACallbackWithAnError) {
-  service_.failStop(platform::PlatformError{1, "no buffer"});
+  service_.failStop(Error{1, "no buffer"});
   makeSession();
   session_->startTrace();
 
@@ -60,7 +58,7 @@ TEST_F(FakePerformanceTraceServiceTest, NothingFollowsACallbackWithAnError) {
 }
 
 TEST_F(FakePerformanceTraceServiceTest, AFailedCompletionHasNoLocation) {
-  service_.failCompletion(platform::PlatformError{1, "no disk"});
+  service_.failCompletion(Error{1, "no disk"});
   makeSession();
   session_->startTrace();
 
@@ -70,7 +68,7 @@ TEST_F(FakePerformanceTraceServiceTest, AFailedCompletionHasNoLocation) {
 }
 
 TEST_F(FakePerformanceTraceServiceTest, AFailedStartLeavesNoTrace) {
-  service_.failStart(platform::PlatformError{1, "busy"});
+  service_.failStart(Error{1, "busy"});
   makeSession();
 
   session_->startTrace();

@@ -72,7 +72,7 @@ TEST(FakeRtcReportingService, HandsOutTokensUntilItRefuses) {
 TEST(FakeRtcReportingService, MessagesFailWithAnErrorOrWithout) {
   FakeRtcReportingService service;
   const auto session = service.createSession({}, {}, std::nullopt);
-  service.refuseMessages(platform::RtcReportingSession::SendResult{false, platform::PlatformError{3, "no route"}});
+  service.refuseMessages(platform::RtcReportingSession::SendResult{false, Error{3, "no route"}});
   const auto withError = session->sendMessage(1, 1, {});
   service.refuseMessages(platform::RtcReportingSession::SendResult{});
   const auto without = session->sendMessage(1, 1, {});
@@ -80,7 +80,7 @@ TEST(FakeRtcReportingService, MessagesFailWithAnErrorOrWithout) {
   EXPECT_FALSE(withError.sent);
   EXPECT_EQ(withError.error->text, "no route");
   EXPECT_FALSE(without.sent);
-  EXPECT_FALSE(without.error);
+  EXPECT_TRUE(without.error.ok());
   EXPECT_TRUE(service.sessions().at(0).messages.empty());
   EXPECT_EQ(service.sessions().at(0).attempts, 2U);
 }

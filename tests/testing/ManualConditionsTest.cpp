@@ -27,7 +27,7 @@ TEST(ManualConditions, SignalDuringTheWaitWakesIt) {
       condition->signal();
     });
     signaller.join();
-    return WaitOutcome::TimesOut;
+    return WaitEnd::TimesOut;
   });
   const std::lock_guard lock(*condition);
   EXPECT_TRUE(condition->waitFor(1s));
@@ -43,7 +43,7 @@ TEST(ManualConditions, SignalBeforeTheWaitIsNotRemembered) {
 
 TEST(ManualConditions, HookMayWakeWithoutASignal) {
   ManualConditions conditions;
-  conditions.onWait([](auto) { return WaitOutcome::Wakes; });
+  conditions.onWait([](auto) { return WaitEnd::Wakes; });
   const auto condition = conditions.makeCondition();
   const std::lock_guard lock(*condition);
   EXPECT_TRUE(condition->waitFor(1s));

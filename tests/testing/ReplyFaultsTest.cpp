@@ -33,7 +33,9 @@ struct Farewell {
   Farewell(const Farewell&) = delete;
   Farewell& operator=(const Farewell&) = delete;
   ~Farewell() {
-    if (destroyed != nullptr) ++*destroyed;
+    if (destroyed != nullptr) {
+      ++*destroyed;
+    }
   }
   int* destroyed;
 };
@@ -152,7 +154,9 @@ TEST(ReplyFaults, AReplyOnAnotherThreadRunsWhileTheCallerGoesOn) {
   faults.set(ReplyFault::OtherThread);
 
   faults.deliver([&] {
-    while (!released) std::this_thread::yield();
+    while (!released) {
+      std::this_thread::yield();
+    }
     repliedOn = std::this_thread::get_id();
   });
   released = true;

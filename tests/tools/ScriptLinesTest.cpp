@@ -27,9 +27,7 @@ class Pipe {
   void feed(std::string_view text) {
     while (!text.empty()) {
       const auto count = ::write(ends_[1], text.data(), text.size());
-      if (count <= 0) {
-        return;
-      }
+      if (count <= 0) return;
       text.remove_prefix(static_cast<std::size_t>(count));
     }
   }
@@ -51,7 +49,7 @@ std::vector<std::string> allLines(ScriptLines& lines) {
     const auto next = lines.next(line);
     if (next == ScriptLines::Next::Line) {
       all.emplace_back(line);
-    } else if (next != ScriptLines::Next::Incomplete || !lines.fill()) {
+    } else if (next != ScriptLines::Next::Incomplete || lines.fill().failed()) {
       return all;
     }
   }
@@ -80,7 +78,7 @@ TEST(ScriptLines, YieldsALineBeforeTheNextOneComes) {
   ScriptLines lines(pipe.fd());
   std::string_view line;
   EXPECT_EQ(lines.next(line), ScriptLines::Next::Incomplete);
-  ASSERT_TRUE(lines.fill());
+  ASSERT_TRUE(lines.fill().ok());
   EXPECT_EQ(lines.next(line), ScriptLines::Next::Line);
   EXPECT_EQ(line, "one");
   EXPECT_EQ(lines.next(line), ScriptLines::Next::Incomplete);
@@ -94,9 +92,7 @@ TEST(ScriptLines, RefusesALineThatIsTooLongBeforeItHasAllCome) {
   ScriptLines::Next next = ScriptLines::Next::Incomplete;
   while (next == ScriptLines::Next::Incomplete || next == ScriptLines::Next::Line) {
     next = lines.next(line);
-    if (next == ScriptLines::Next::Incomplete && !lines.fill()) {
-      break;
-    }
+    if (next == ScriptLines::Next::Incomplete && lines.fill().failed()) break;
   }
   feeder.join();
   EXPECT_EQ(next, ScriptLines::Next::TooLong);
@@ -106,8 +102,7 @@ TEST(ScriptLines, RefusesALineThatIsTooLongBeforeItHasAllCome) {
 TEST(ScriptLines, SaysWhyItCannotRead) {
   const int folder = ::open("/", O_RDONLY | O_CLOEXEC);
   ScriptLines lines(folder);
-  EXPECT_FALSE(lines.fill());
-  EXPECT_FALSE(lines.error().empty());
+  EXPECT_EQ(lines.fill().text(), "Is a directory");
   ::close(folder);
 }
 

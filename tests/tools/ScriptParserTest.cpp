@@ -5,27 +5,21 @@
 #include <filesystem>
 #include <fstream>
 #include <string>
-#include <variant>
+#include <utility>
 
 namespace tarn::script {
 namespace {
 
 ScriptStep parsed(std::string_view text) {
-  auto result = parseLine(text, 7);
-  if (const auto* fault = std::get_if<Fault>(&result)) {
-    ADD_FAILURE() << text << ": " << fault->text;
-    return {};
-  }
-  return std::get<ScriptStep>(result);
+  auto [step, error] = parseLine(text, 7);
+  EXPECT_TRUE(error.ok()) << text << ": " << error.text();
+  return std::move(step);
 }
 
 std::string faultOf(std::string_view text) {
-  const auto result = parseLine(text, 7);
-  if (const auto* fault = std::get_if<Fault>(&result)) {
-    return fault->text;
-  }
-  ADD_FAILURE() << text << " was taken";
-  return {};
+  const Result<ScriptStep> result = parseLine(text, 7);
+  EXPECT_TRUE(result.failed()) << text << " was taken";
+  return result.error.text();
 }
 
 bool contains(const std::string& text, std::string_view part) {
@@ -164,6 +158,13 @@ TEST(ScriptParser, RefusesValuesOfAnotherKind) {
   faultOf(R"({"op":17})");
 }
 
+TEST(ScriptParser, ShowsAWrongValueAsItIsWritten) {
+  EXPECT_TRUE(contains(faultOf("[]"), "the line is [], expected"));
+  EXPECT_TRUE(contains(faultOf(R"({"op":"reporterID","reporterID":true})"), "is true, expected"));
+  EXPECT_TRUE(contains(faultOf(R"({"op":"reporterID","reporterID":{"a":[1,"b"]}})"), R"(is {"a":[1,"b"]}, expected)"));
+  EXPECT_TRUE(contains(faultOf(R"({"op":"reporterID","reporterID":"1"})"), R"(is "1", expected)"));
+}
+
 TEST(ScriptParser, NamesTheMemberThatIsMissing) {
   EXPECT_TRUE(contains(faultOf(R"({"op":"sendMessage","category":1,"type":0})"), "lacks the member \"message\""));
   EXPECT_TRUE(contains(faultOf(R"({"op":"setServiceType","serviceType":1})"), "lacks the member \"reporterID\""));
@@ -235,11 +236,10 @@ TEST(ScriptParser, TakesOrRefusesEveryBeginningOfTheSeeds) {
     std::ifstream file(entry.path());
     for (std::string line; std::getline(file, line);) {
       for (std::size_t length = 0; length <= line.size(); ++length) {
-        const auto result = parseLine(std::string_view(line).substr(0, length), 1);
-        const auto* fault = std::get_if<Fault>(&result);
-        ASSERT_TRUE(fault == nullptr || !fault->text.empty()) << entry.path() << ": " << line;
-        ASSERT_TRUE(fault != nullptr || length == line.size()) << "taken: " << line.substr(0, length);
-        taken += fault == nullptr ? 1U : 0U;
+        const Status fault = parseLine(std::string_view(line).substr(0, length), 1).error;
+        ASSERT_TRUE(fault.ok() || !fault->text.empty()) << entry.path() << ": " << line;
+        ASSERT_TRUE(fault.failed() || length == line.size()) << "taken: " << line.substr(0, length);
+        taken += fault.ok() ? 1U : 0U;
       }
     }
   }

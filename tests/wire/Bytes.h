@@ -42,20 +42,20 @@ inline std::span<const std::byte> asBytes(std::string_view bytes) {
 }
 
 struct Decoded {
-  wire::DecodeOutcome outcome{};
+  wire::DecodeVerdict verdict{};
   wire::DecodedRequest request;
   wire::Refusal refusal;
 
-  bool ok() const { return outcome == wire::DecodeOutcome::Ok; }
-  bool unreadable() const { return outcome == wire::DecodeOutcome::Unreadable; }
+  bool ok() const { return verdict == wire::DecodeVerdict::Ok; }
+  bool unreadable() const { return verdict == wire::DecodeVerdict::Unreadable; }
   // The code of the answer, 0 when the frame wasn't refused.
-  int code() const { return outcome == wire::DecodeOutcome::Refused ? static_cast<int>(refusal.code) : 0; }
+  int code() const { return verdict == wire::DecodeVerdict::Refused ? static_cast<int>(refusal.code) : 0; }
 };
 
 inline Decoded decodeBytes(std::string_view frame) {
   wire::RequestDecoder decoder;
   Decoded decoded;
-  decoded.outcome = decoder.decode(asBytes(frame), decoded.request, decoded.refusal);
+  decoded.verdict = decoder.decode(asBytes(frame), decoded.request, decoded.refusal);
   return decoded;
 }
 

@@ -123,7 +123,9 @@ TEST(FrameBuffer, MemoryStaysWithinTheLargestFrameAndAGulpAndShrinksBack) {
     sent += count;
     ASSERT_LT(heap.bytes(), static_cast<std::ptrdiff_t>(2 * sent) + 2 * kGulp + kSlack);
     ASSERT_LT(heap.bytes(), static_cast<std::ptrdiff_t>(kDefaultMaxFrameBytes) + kGulp + kSlack);
-    for (const std::string& frame : takeAll(buffer)) frames.push_back(frame.size());
+    for (const std::string& frame : takeAll(buffer)) {
+      frames.push_back(frame.size());
+    }
   }
   EXPECT_EQ(frames, (std::vector<std::size_t>{kDefaultMaxFrameBytes, 4}));
   buffer.space();
@@ -254,7 +256,9 @@ TEST(FrameBuffer, RandomPiecesYieldTheFramesThatWereSent) {
     std::vector<std::string> got;
     for (std::size_t at = 0; at < stream.size();) {
       at += feed(buffer, std::string_view(stream).substr(at, 1 + random() % 100000));
-      for (std::string& frame : takeAll(buffer)) got.push_back(std::move(frame));
+      for (std::string& frame : takeAll(buffer)) {
+        got.push_back(std::move(frame));
+      }
     }
     EXPECT_TRUE(got == sent);
   }

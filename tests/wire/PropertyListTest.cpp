@@ -158,7 +158,9 @@ TEST(PropertyList, NestingReaches64LevelsAndNoFurther) {
   EXPECT_EQ(decodeBytes(valueFrame(std::string(63, '\x81') + '\x80')).code(), 3);
   EXPECT_TRUE(decodeBytes(valueFrame(std::string(63, '\x81') + '\x05')).ok());
   std::string maps;
-  for (int i = 0; i < 62; ++i) maps += fromHex("a1616b");
+  for (int i = 0; i < 62; ++i) {
+    maps += fromHex("a1616b");
+  }
   EXPECT_TRUE(decodeBytes(valueFrame(maps + fromHex("a0"))).ok());
   EXPECT_EQ(decodeBytes(valueFrame(maps + fromHex("a1616ba0"))).code(), 3);
   expectRefused(testing::toHex(std::string(64, '\x81') + '\x05'), "nested too deep");

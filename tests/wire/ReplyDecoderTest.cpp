@@ -11,31 +11,31 @@ namespace {
 using testing::asBytes;
 using testing::fromHex;
 
-struct Outcome {
+struct Decoded {
   bool good = false;
   DecodedReply reply;
   std::string reason;
 };
 
-Outcome decode(std::string_view hex) {
+Decoded decode(std::string_view hex) {
   ReplyDecoder decoder;
-  Outcome outcome;
-  outcome.good = decoder.decode(asBytes(fromHex(hex)), outcome.reply, outcome.reason);
-  return outcome;
+  Decoded decoded;
+  decoded.good = decoder.decode(asBytes(fromHex(hex)), decoded.reply, decoded.reason);
+  return decoded;
 }
 
 TEST(ReplyDecoder, ReadsIDNullAndResults) {
-  const Outcome outcome = decode(
+  const Decoded decoded = decode(
       "851907d0f6f5"
       "8201820203"
       "a161610b");
-  ASSERT_TRUE(outcome.good) << outcome.reason;
-  EXPECT_EQ(outcome.reply.id, 2000U);
-  EXPECT_FALSE(outcome.reply.error.has_value());
-  ASSERT_EQ(outcome.reply.results.size(), 3U);
-  EXPECT_EQ(outcome.reply.results[0], plist::Value(true));
-  EXPECT_EQ(outcome.reply.results[1], plist::Value(plist::Array{1, plist::Array{2, 3}}));
-  EXPECT_EQ(outcome.reply.results[2], plist::Value(plist::Dictionary{{"a", 11}}));
+  ASSERT_TRUE(decoded.good) << decoded.reason;
+  EXPECT_EQ(decoded.reply.id, 2000U);
+  EXPECT_FALSE(decoded.reply.error.has_value());
+  ASSERT_EQ(decoded.reply.results.size(), 3U);
+  EXPECT_EQ(decoded.reply.results[0], plist::Value(true));
+  EXPECT_EQ(decoded.reply.results[1], plist::Value(plist::Array{1, plist::Array{2, 3}}));
+  EXPECT_EQ(decoded.reply.results[2], plist::Value(plist::Dictionary{{"a", 11}}));
 }
 
 TEST(ReplyDecoder, RefusedDictionariesLeaveNoMemoryBehind) {
@@ -53,18 +53,18 @@ TEST(ReplyDecoder, RefusedDictionariesLeaveNoMemoryBehind) {
 }
 
 TEST(ReplyDecoder, ReadsErrors) {
-  const Outcome outcome = decode(
+  const Decoded decoded = decode(
       "82"
       "07"
       "83"
       "6161"
       "21"
       "6162");
-  ASSERT_TRUE(outcome.good) << outcome.reason;
-  ASSERT_TRUE(outcome.reply.error.has_value());
-  EXPECT_EQ(outcome.reply.error->domain, "a");
-  EXPECT_EQ(outcome.reply.error->code, -2);
-  EXPECT_EQ(outcome.reply.error->text, "b");
+  ASSERT_TRUE(decoded.good) << decoded.reason;
+  ASSERT_TRUE(decoded.reply.error.has_value());
+  EXPECT_EQ(decoded.reply.error->domain, "a");
+  EXPECT_EQ(decoded.reply.error->code, -2);
+  EXPECT_EQ(decoded.reply.error->text, "b");
 }
 
 TEST(ReplyDecoder, RefusesWhatIsNoReplyAndSaysWhy) {
@@ -115,9 +115,9 @@ TEST(ReplyDecoder, RefusesWhatIsNoReplyAndSaysWhy) {
       {"8307f6bf", "a result that is no property-list value"},
       {"8207f600", "bytes behind the array"}};
   for (const auto& [hex, reason] : frames) {
-    const Outcome outcome = decode(hex);
-    EXPECT_FALSE(outcome.good) << hex;
-    EXPECT_EQ(outcome.reason, reason) << hex;
+    const Decoded decoded = decode(hex);
+    EXPECT_FALSE(decoded.good) << hex;
+    EXPECT_EQ(decoded.reason, reason) << hex;
   }
 }
 
@@ -159,9 +159,13 @@ TEST(ReplyDecoder, WhatWasNotDecodedHasNoNumberAndNoCode) {
 
 TEST(ReplyDecoder, ResultsNestAsDeepAsArgumentsAndNoDeeper) {
   std::string maps;
-  for (std::size_t i = 0; i + 1 < kMaxNesting; ++i) maps += "a1616b";
+  for (std::size_t i = 0; i + 1 < kMaxNesting; ++i) {
+    maps += "a1616b";
+  }
   std::string arrays;
-  for (std::size_t i = 0; i + 1 < kMaxNesting; ++i) arrays += "81";
+  for (std::size_t i = 0; i + 1 < kMaxNesting; ++i) {
+    arrays += "81";
+  }
   EXPECT_TRUE(decode("8307f6" + arrays + "80").good);
   EXPECT_FALSE(decode("8307f6" + arrays + "8180").good);
   EXPECT_TRUE(decode("8307f6" + maps + "a0").good);

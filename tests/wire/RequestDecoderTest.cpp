@@ -101,9 +101,9 @@ TEST(RequestDecoder, NothingOfAnEarlierRequestRemains) {
   DecodedRequest request;
   Refusal refusal;
   const std::string full = fromHex("860706a1616b05010281182a");
-  ASSERT_EQ(decoder.decode(asBytes(full), request, refusal), DecodeOutcome::Ok);
+  ASSERT_EQ(decoder.decode(asBytes(full), request, refusal), DecodeVerdict::Ok);
   const std::string bare = fromHex("82080a");
-  ASSERT_EQ(decoder.decode(asBytes(bare), request, refusal), DecodeOutcome::Ok);
+  ASSERT_EQ(decoder.decode(asBytes(bare), request, refusal), DecodeVerdict::Ok);
   EXPECT_TRUE(request.dictionary.empty());
   EXPECT_EQ(request.category, 0U);
   EXPECT_FALSE(request.reporterIDs.has_value());
@@ -315,7 +315,7 @@ TEST(RequestDecoder, RefusedDictionariesLeaveNoMemoryBehind) {
     Refusal refusal;
     const testing::HeapGrowth heap;
     for (int i = 0; i < 20'000; ++i) {
-      ASSERT_EQ(decoder.decode(asBytes(frame), request, refusal), DecodeOutcome::Refused);
+      ASSERT_EQ(decoder.decode(asBytes(frame), request, refusal), DecodeVerdict::Refused);
     }
     EXPECT_LT(heap.bytes(), 16'384) << hex;
   }
@@ -334,9 +334,9 @@ TEST(RequestDecoder, ARefusedDictionaryLeavesNothingForTheNextRequest) {
   DecodedRequest request;
   Refusal refusal;
   const std::string bad = testing::valueFrame(fromHex("8301a1616d02f6"));
-  ASSERT_EQ(decoder.decode(asBytes(bad), request, refusal), DecodeOutcome::Refused);
+  ASSERT_EQ(decoder.decode(asBytes(bad), request, refusal), DecodeVerdict::Refused);
   const std::string good = testing::valueFrame(fromHex("05"));
-  ASSERT_EQ(decoder.decode(asBytes(good), request, refusal), DecodeOutcome::Ok);
+  ASSERT_EQ(decoder.decode(asBytes(good), request, refusal), DecodeVerdict::Ok);
   EXPECT_EQ(request.dictionary, (plist::Dictionary{{"k", 5}}));
 }
 

@@ -94,7 +94,9 @@ json toPeer(const plist::ValueView& value) {
       return json::binary({value.data().begin(), value.data().end()});
     case plist::Kind::Array: {
       json made = json::array();
-      for (const plist::ValueView item : value.array()) made.push_back(toPeer(item));
+      for (const plist::ValueView item : value.array()) {
+        made.push_back(toPeer(item));
+      }
       return made;
     }
     case plist::Kind::Dictionary: {
@@ -174,7 +176,7 @@ TEST(RoundTrip, DamagedFramesGetAnOutcomeThatFitsTheirBytes) {
         bytes[maker.below(bytes.size())] = static_cast<char>(maker.below(256));
       }
       const testing::Decoded decoded = testing::decodeBytes(bytes);
-      ++outcomes[static_cast<std::size_t>(decoded.outcome)];
+      ++outcomes[static_cast<std::size_t>(decoded.verdict)];
       const bool wellFormed = checkOneItem(asBytes(bytes)) == nullptr;
       if (!decoded.unreadable()) {
         EXPECT_TRUE(wellFormed) << testing::toHex(bytes);

@@ -56,7 +56,9 @@ TEST(Utf8, KnowsTheLengthOfEveryCharacterAndOfNothingElse) {
         const std::string text{static_cast<char>(first), static_cast<char>(second), third, '\xBF'};
         std::size_t expected = 0;
         for (std::size_t length = 1; length <= text.size(); ++length) {
-          if (characters.contains(text.substr(0, length))) expected = length;
+          if (characters.contains(text.substr(0, length))) {
+            expected = length;
+          }
         }
         ASSERT_EQ(utf8CharacterLength(text), expected) << first << ' ' << second << ' ' << int{third};
       }

@@ -242,7 +242,9 @@ TEST(WellFormed, AMillionContainersInsideEachOtherAreWalkedWithoutAStack) {
   EXPECT_EQ(checkOneItem(asBytes(std::string(kDepth, '\x9f') + std::string(kDepth, '\xff'))), nullptr);
   EXPECT_EQ(checkOneItem(asBytes(std::string(kDepth, '\xc1') + '\0')), nullptr);
   std::string mapsInMaps;
-  for (std::size_t i = 0; i < kDepth; ++i) mapsInMaps += fromHex("a100");
+  for (std::size_t i = 0; i < kDepth; ++i) {
+    mapsInMaps += fromHex("a100");
+  }
   EXPECT_EQ(checkOneItem(asBytes(mapsInMaps + '\0')), nullptr);
   EXPECT_NE(checkOneItem(asBytes(std::string(kDepth, '\x82'))), nullptr);
 }

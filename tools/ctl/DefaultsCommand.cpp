@@ -51,19 +51,15 @@ int print(const plist::ValueView& value, JsonLayout layout) {
 }
 
 int read(const Context& context, const Arguments& arguments) {
-  if (!isNamed(context.stateDirectory, "--state-dir")) {
-    return kWrongUsage;
-  }
+  if (!isNamed(context.stateDirectory, "--state-dir")) return kWrongUsage;
   Defaults defaults(context);
   const JsonDefaultsStore::Suite suite = defaults->suite(arguments.suite);
-  if (!suite.fault.empty()) {
-    complain(printable(suite.fault));
+  if (suite.failed()) {
+    complain(printable(suite.error->text));
     return kBadInput;
   }
-  if (arguments.wholeSuite) {
-    return print(suite.values, JsonLayout::Indented);
-  }
-  const plist::ValueView value = suite.values.get(arguments.key);
+  if (arguments.wholeSuite) return print(suite.value, JsonLayout::Indented);
+  const plist::ValueView value = suite.value.get(arguments.key);
   if (!value.present()) {
     complain("there is no key \"" + printable(arguments.key) + "\" in " + printable(arguments.suite));
     return kFailure;
@@ -73,16 +69,12 @@ int read(const Context& context, const Arguments& arguments) {
 
 // An absent value removes the key.
 int store(const Context& context, const Arguments& arguments, const plist::ValueView& value) {
-  if (!isNamed(context.stateDirectory, "--state-dir")) {
-    return kWrongUsage;
-  }
+  if (!isNamed(context.stateDirectory, "--state-dir")) return kWrongUsage;
   Defaults defaults(context);
-  const bool isBroken = !defaults->suite(arguments.suite).fault.empty();
-  const std::string fault = defaults->store(arguments.suite, arguments.key, value);
-  if (fault.empty()) {
-    return kSuccess;
-  }
-  complain(printable(fault));
+  const bool isBroken = defaults->suite(arguments.suite).failed();
+  const Status stored = defaults->store(arguments.suite, arguments.key, value);
+  if (stored.ok()) return kSuccess;
+  complain(printable(stored->text));
   return isBroken ? kBadInput : kFailure;
 }
 

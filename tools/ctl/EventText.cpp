@@ -35,9 +35,7 @@ void column(std::string& line, const std::string& text, int width) {
 // 2026-11-20T10:00:00.125Z
 std::string timeText(double epochSeconds) {
   constexpr double kLastSecond = 253402300799;  // of the year 9999
-  if (!(epochSeconds >= 0 && epochSeconds <= kLastSecond)) {
-    return std::to_string(epochSeconds);
-  }
+  if (!(epochSeconds >= 0 && epochSeconds <= kLastSecond)) return std::to_string(epochSeconds);
   const auto milliseconds = static_cast<std::int64_t>(std::floor(epochSeconds * 1000));
   std::string text;
   plist::appendDateAndTime(text, *plist::calendarDate(static_cast<double>(milliseconds / 1000)), 'T');

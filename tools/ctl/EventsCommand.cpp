@@ -71,17 +71,13 @@ class EventPrinter {
 
 int EventPrinter::print() {
   after_ = arguments_.query.after;
-  if (!printNew()) {
-    return kFailure;
-  }
+  if (!printNew()) return kFailure;
   if (isMissing_ && !arguments_.follow) {
     complain("there are no events: " + printable(path_) + " is not there");
     return kFailure;
   }
   while (arguments_.follow && stopRequested == 0 && output_.good() && outputIsWanted()) {
-    if (reader_.waitForChange(kPatience) && !printNew()) {
-      return kFailure;
-    }
+    if (reader_.waitForChange(kPatience) && !printNew()) return kFailure;
   }
   return output_.status();
 }
@@ -93,13 +89,11 @@ bool EventPrinter::printNew() {
     query.after = after_;
     result = reader_.read(query);
     if (result.status == EventReader::Status::Failed) {
-      complain("can't read " + printable(path_) + ": " + printable(result.error));
+      complain("can't read " + printable(result.error));
       return false;
     }
     isMissing_ = result.status == EventReader::Status::Missing;
-    if (isMissing_) {
-      return true;
-    }
+    if (isMissing_) return true;
     for (const recorder::EventRow& row : result.rows) {
       printRow(row);
     }
@@ -121,9 +115,7 @@ void EventPrinter::printRow(const recorder::EventRow& row) {
 }
 
 int events(const Context& context, Arguments& arguments, bool hasBackend, bool hasName) {
-  if (!isNamed(context.stateDirectory, "--state-dir")) {
-    return kWrongUsage;
-  }
+  if (!isNamed(context.stateDirectory, "--state-dir")) return kWrongUsage;
   if (hasBackend) {
     arguments.query.backend = arguments.backend;
   }

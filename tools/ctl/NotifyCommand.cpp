@@ -32,15 +32,11 @@ std::string checkStateWord(const std::string& text) {
 }
 
 int notify(const Context& context, const Arguments& arguments) {
-  if (!isNamed(context.stateDirectory, "--state-dir")) {
-    return kWrongUsage;
-  }
+  if (!isNamed(context.stateDirectory, "--state-dir")) return kWrongUsage;
   const linux_host::NotificationFolder notifications(context.stateDirectory + "/notifications");
-  const std::string fault = notifications.post(arguments.name, stateWord(arguments.state));
-  if (fault.empty()) {
-    return kSuccess;
-  }
-  complain(printable(fault));
+  const Status posted = notifications.post(arguments.name, stateWord(arguments.state));
+  if (posted.ok()) return kSuccess;
+  complain(printable(posted->text));
   return kFailure;
 }
 

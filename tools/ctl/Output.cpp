@@ -10,9 +10,7 @@
 namespace tarn::ctl {
 
 bool Output::line(std::string_view text) {
-  if (!good()) {
-    return false;
-  }
+  if (!good()) return false;
   buffer_.assign(text);
   buffer_ += '\n';
   failure_ = linux_host::writeAll(fd_, buffer_);
@@ -20,9 +18,7 @@ bool Output::line(std::string_view text) {
 }
 
 int Output::status() const {
-  if (good() || failure_->code == EPIPE) {
-    return kSuccess;
-  }
+  if (good() || failure_->code == EPIPE) return kSuccess;
   complain("can't write the results: " + failure_->text);
   return kFailure;
 }

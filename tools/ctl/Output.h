@@ -7,7 +7,7 @@
 #include <string>
 #include <string_view>
 
-#include "platform/Outcome.h"
+#include "plist/Result.h"
 
 namespace tarn::ctl {
 
@@ -21,7 +21,7 @@ class Output {
   // Writes one line now; its line end is added. False once anything could not be written.
   bool line(std::string_view text);
 
-  bool good() const noexcept { return !failure_; }
+  bool good() const noexcept { return failure_.ok(); }
   // The exit status that the output itself asks for: success while it is good, and when the reader simply left; else it
   // complains and says failure.
   int status() const;
@@ -29,7 +29,7 @@ class Output {
  private:
   int fd_;
   std::string buffer_;
-  platform::MaybeError failure_;
+  Status failure_;
 };
 
 // Writes "tarnreportingctl: TEXT" to stderr.

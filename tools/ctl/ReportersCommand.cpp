@@ -12,9 +12,7 @@ namespace {
 
 int reporters(const Context& context) {
   const Answer answer = askService(context.socket, client::getAllReporters());
-  if (answer.status != 0) {
-    return answer.status;
-  }
+  if (answer.status != 0) return answer.status;
   Output output(STDOUT_FILENO);
   for (const std::int64_t reporterID : answer.reply.numbers()) {
     output.line(std::to_string(reporterID));

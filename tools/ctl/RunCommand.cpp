@@ -6,8 +6,8 @@
 #include <memory>
 #include <string>
 #include <string_view>
-#include <system_error>
 
+#include "host/system/SystemError.h"
 #include "tools/ctl/Command.h"
 #include "tools/ctl/ExitStatus.h"
 #include "tools/ctl/Output.h"
@@ -91,12 +91,10 @@ class InputFile {
 };
 
 int run(const Context& context, const std::string& path) {
-  if (!isNamed(context.socket, "--socket")) {
-    return kWrongUsage;
-  }
+  if (!isNamed(context.socket, "--socket")) return kWrongUsage;
   const InputFile file(path);
   if (file.fd() < 0) {
-    complain("can't open the script " + printable(path) + ": " + std::generic_category().message(errno));
+    complain(linux_host::errorOf("can't open the script " + printable(path), errno).text);
     return kBadInput;
   }
   Output output(STDOUT_FILENO);

@@ -6,11 +6,10 @@
 #include <cerrno>
 #include <iostream>
 #include <limits>
-#include <system_error>
 #include <utility>
-#include <variant>
 #include <vector>
 
+#include "host/system/SystemError.h"
 #include "plist/EscapedText.h"
 #include "plist/formats/Json.h"
 #include "tools/ctl/ExitStatus.h"
@@ -20,9 +19,9 @@ namespace tarn::ctl {
 
 namespace {
 
+using client::ClientConnection;
 using client::Outcome;
 using client::Reply;
-using client::TarnReportingClient;
 using script::ScriptLines;
 using script::ScriptStep;
 
@@ -71,9 +70,7 @@ void appendError(std::string& out, const Reply& reply) {
 }
 
 int pollTimeout(std::optional<std::chrono::steady_clock::time_point> deadline) {
-  if (!deadline) {
-    return -1;
-  }
+  if (!deadline) return -1;
   const auto left = std::chrono::ceil<std::chrono::milliseconds>(*deadline - std::chrono::steady_clock::now()).count();
   return static_cast<int>(std::clamp<std::int64_t>(left, 0, std::numeric_limits<int>::max()));
 }
@@ -109,17 +106,13 @@ bool ScriptPlayer::playLines(int fd) {
         return stop(kBadInput,
                     "the line is too long, expected at most " + std::to_string(ScriptLines::kMaxLineBytes) + " bytes");
       case ScriptLines::Next::Incomplete:
-        if (!waitForInput(fd)) {
-          return false;
-        }
-        if (!lines.fill()) {
-          return stop(kBadInput, "can't read the script: " + lines.error());
+        if (!waitForInput(fd)) return false;
+        if (const Status filled = lines.fill(); filled.failed()) {
+          return stop(kBadInput, "can't read the script: " + filled->text);
         }
         break;
       case ScriptLines::Next::Line:
-        if (!playLine(text, line_)) {
-          return false;
-        }
+        if (!playLine(text, line_)) return false;
         break;
     }
   }
@@ -127,14 +120,10 @@ bool ScriptPlayer::playLines(int fd) {
 }
 
 bool ScriptPlayer::playLine(std::string_view text, std::size_t line) {
-  if (script::isBlank(text)) {
-    return true;
-  }
-  const auto parsed = script::parseLine(text, line);
-  if (const auto* fault = std::get_if<script::Fault>(&parsed)) {
-    return stop(kBadInput, fault->text);
-  }
-  return playStep(std::get<ScriptStep>(parsed));
+  if (script::isBlank(text)) return true;
+  const Result<ScriptStep> parsed = script::parseLine(text, line);
+  if (parsed.failed()) return stop(kBadInput, parsed.error->text);
+  return playStep(parsed.value);
 }
 
 bool ScriptPlayer::playStep(const ScriptStep& step) {
@@ -151,9 +140,7 @@ bool ScriptPlayer::playStep(const ScriptStep& step) {
 
 bool ScriptPlayer::playRequest(const ScriptStep& step) {
   Connection* connection = connect(step.client);
-  if (connection == nullptr || !settleStarts(connection)) {
-    return false;
-  }
+  if (connection == nullptr || !settleStarts(connection)) return false;
   const wire::Result result = wire::rowOf(step.request.operation).result;
   const bool isStart = result == wire::Result::TrueAtStop;
   const bool isKill = result == wire::Result::NoReply;
@@ -168,9 +155,7 @@ bool ScriptPlayer::playRequest(const ScriptStep& step) {
           printReply(named, reply);
         }
       });
-  if (status == client::SendStatus::TooLarge) {
-    return stop(kBadInput, step.op + " is too long for a frame");
-  }
+  if (status == client::SendStatus::TooLarge) return stop(kBadInput, step.op + " is too long for a frame");
   serviceWasKilled_ = serviceWasKilled_ || isKill;
   connection->startIsUnserved = connection->startIsUnserved || isStart;
   if (isStart || isKill) {
@@ -182,12 +167,8 @@ bool ScriptPlayer::playRequest(const ScriptStep& step) {
 
 bool ScriptPlayer::waitForReply(const std::string& name, Connection& connection, const bool& done) {
   while (!done) {
-    if (!connection.client->connected()) {
-      return stopForLoss(name, connection);
-    }
-    if (!pump(std::nullopt)) {
-      return false;
-    }
+    if (!connection.client->connected()) return stopForLoss(name, connection);
+    if (!pump(std::nullopt)) return false;
   }
   // The service serves a connection's requests in order, so what was sent before was served before.
   connection.startIsUnserved = false;
@@ -203,9 +184,7 @@ bool ScriptPlayer::settle(const std::string& name, Connection& connection) {
 bool ScriptPlayer::settleStarts(const Connection* except) {
   for (auto& [name, connection] : connections_) {
     const bool needsIt = &connection != except && connection.startIsUnserved && connection.client->connected();
-    if (needsIt && !settle(name, connection)) {
-      return false;
-    }
+    if (needsIt && !settle(name, connection)) return false;
   }
   return true;
 }
@@ -213,22 +192,16 @@ bool ScriptPlayer::settleStarts(const Connection* except) {
 bool ScriptPlayer::sleep(double seconds) {
   const auto deadline = Clock::now() + std::chrono::ceil<Clock::duration>(std::chrono::duration<double>(seconds));
   while (Clock::now() < deadline) {
-    if (!pump(deadline)) {
-      return false;
-    }
+    if (!pump(deadline)) return false;
   }
   return true;
 }
 
 bool ScriptPlayer::disconnect(const std::string& name) {
   const auto found = connections_.find(name);
-  if (found == connections_.end()) {
-    return true;
-  }
+  if (found == connections_.end()) return true;
   Connection& connection = found->second;
-  if (connection.startIsUnserved && connection.client->connected() && !settle(name, connection)) {
-    return false;
-  }
+  if (connection.startIsUnserved && connection.client->connected() && !settle(name, connection)) return false;
   connections_.erase(found);
   return true;
 }
@@ -236,18 +209,12 @@ bool ScriptPlayer::disconnect(const std::string& name) {
 // A start that needn't be held is answered at once: such replies are fetched. A killed service is waited for, so that
 // who comes next finds it gone.
 bool ScriptPlayer::finish() {
-  if (!serviceWasKilled_) {
-    return settleStarts(nullptr);
-  }
+  if (!serviceWasKilled_) return settleStarts(nullptr);
   const auto deadline = Clock::now() + kKillPatience;
   const auto isConnected = [](const auto& entry) { return entry.second.client->connected(); };
   while (std::any_of(connections_.begin(), connections_.end(), isConnected)) {
-    if (Clock::now() >= deadline) {
-      return stop(kFailure, "the service was told to end and still runs");
-    }
-    if (!pump(deadline)) {
-      return false;
-    }
+    if (Clock::now() >= deadline) return stop(kFailure, "the service was told to end and still runs");
+    if (!pump(deadline)) return false;
   }
   return true;
 }
@@ -261,13 +228,13 @@ ScriptPlayer::Connection* ScriptPlayer::connect(const std::string& name) {
     }
     return &found->second;
   }
-  auto connected = TarnReportingClient::connect(socketPath_, connectionOptions());
-  if (!connected.client) {
-    stop(kUnreachable, "the service can't be reached: " + connected.error);
+  auto connected = ClientConnection::connect(socketPath_, connectionOptions());
+  if (connected.failed()) {
+    stop(kUnreachable, "the service can't be reached: " + connected.error->text);
     return nullptr;
   }
   Connection& connection = connections_[name];
-  connection.client = std::move(connected.client);
+  connection.client = std::move(connected.value);
   connection.client->setLostHandler([&connection](const std::string& why) { connection.lossReason = why; });
   return &connection;
 }
@@ -283,9 +250,7 @@ bool ScriptPlayer::pump(std::optional<Clock::time_point> deadline, int inputFd, 
   }
   polled.push_back({inputFd, POLLIN, 0});  // a negative one is passed over
   const int ready = ::poll(polled.data(), polled.size(), pollTimeout(deadline));
-  if (ready < 0 && errno != EINTR) {
-    return stop(kFailure, std::string("can't wait for replies: ") + std::generic_category().message(errno));
-  }
+  if (ready < 0 && errno != EINTR) return stop(kFailure, linux_host::errorOf("can't wait for replies", errno).text);
   for (auto& [name, connection] : connections_) {
     if (connection.client->connected()) {
       connection.client->dispatch();
@@ -300,21 +265,15 @@ bool ScriptPlayer::pump(std::optional<Clock::time_point> deadline, int inputFd, 
 bool ScriptPlayer::waitForInput(int fd) {
   bool isReady = false;
   while (!isReady) {
-    if (!pump(std::nullopt, fd, &isReady)) {
-      return false;
-    }
+    if (!pump(std::nullopt, fd, &isReady)) return false;
   }
   return true;
 }
 
 bool ScriptPlayer::checkConnections() {
-  if (serviceWasKilled_) {
-    return true;
-  }
+  if (serviceWasKilled_) return true;
   for (const auto& [name, connection] : connections_) {
-    if (!connection.client->connected()) {
-      return stopForLoss(name, connection);
-    }
+    if (!connection.client->connected()) return stopForLoss(name, connection);
   }
   return true;
 }

@@ -17,7 +17,7 @@
 #include <string>
 #include <string_view>
 
-#include "client/TarnReportingClient.h"
+#include "client/ClientConnection.h"
 #include "tools/ctl/Output.h"
 #include "tools/script/ScriptLines.h"
 #include "tools/script/ScriptStep.h"
@@ -40,7 +40,7 @@ class ScriptPlayer {
   struct Connection {
     std::string lossReason;
     bool startIsUnserved = false;  // a start was sent and nothing answered since
-    std::unique_ptr<client::TarnReportingClient> client;
+    std::unique_ptr<client::ClientConnection> client;
   };
 
   // Each returns whether the script goes on; when not, status_ and stderr say why.

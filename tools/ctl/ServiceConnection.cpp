@@ -13,13 +13,13 @@ Answer askService(const std::string& socketPath, const client::Request& request)
     answer.status = kWrongUsage;
     return answer;
   }
-  const auto connected = client::TarnReportingClient::connect(socketPath);
-  if (!connected.client) {
-    complain("the service can't be reached: " + connected.error);
+  const auto connected = client::ClientConnection::connect(socketPath);
+  if (connected.failed()) {
+    complain("the service can't be reached: " + connected.error->text);
     answer.status = kUnreachable;
     return answer;
   }
-  answer.reply = connected.client->call(request, kPatience);
+  answer.reply = connected.value->call(request, kPatience);
   switch (answer.reply.outcome) {
     case client::Outcome::Ok:
       break;

@@ -4,7 +4,7 @@
 #include <optional>
 #include <string>
 
-#include "client/TarnReportingClient.h"
+#include "client/ClientConnection.h"
 
 namespace tarn::ctl {
 

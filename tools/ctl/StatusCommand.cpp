@@ -29,9 +29,7 @@ void printStatus(Output& output, const std::string& socket, const plist::Diction
   output.line("ledger");
   for (const auto& entry : status) {
     const std::string name = printable(entry.key.text());
-    if (name == kQuotas) {
-      continue;
-    }
+    if (name == kQuotas) continue;
     if (entry.value.kind() != plist::Kind::Dictionary) {
       printRow(output, name, printable(entry.value.asText()));
       continue;
@@ -62,9 +60,7 @@ void printQuotas(Output& output, const plist::Dictionary& quotas) {
 
 int status(const Context& context, bool asJson, bool quotas) {
   const Answer answer = askService(context.socket, client::status());
-  if (answer.status != 0) {
-    return answer.status;
-  }
+  if (answer.status != 0) return answer.status;
   Output output(STDOUT_FILENO);
   const plist::Dictionary whole = answer.reply.dictionary();
   const plist::Dictionary dictionary = quotas ? whole.get(kQuotas).dictionary() : whole;

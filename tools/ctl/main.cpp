@@ -33,7 +33,7 @@ void describe(CLI::App& app, Context& context) {
       ->capture_default_str()
       ->type_name("DIR");
   app.require_subcommand(1);
-  // The two options above may also stand behind the command.
+  // The two options above may also stand after the command.
   app.fallthrough();
   addRunCommand(app, context);
   addEventsCommand(app, context);
@@ -74,9 +74,7 @@ int mainProgram(int argc, const char* const* argv) {
   context.stateDirectory = linux_host::defaultStateDirectory(environment).value_or("");
   CLI::App app;
   describe(app, context);
-  if (const auto status = parse(app, argc, argv)) {
-    return *status;
-  }
+  if (const auto status = parse(app, argc, argv)) return *status;
   return context.chosen();
 }
 

@@ -17,10 +17,9 @@ REAL_TIME = ("tests/e2e/*", "tests/scenario/*", "tests/host/*", "tests/recorder/
 # A fatal check on our own mistakes, where there is no log yet or no longer.
 LAST_WORDS = ("service/vocabulary/ProcessState.cpp", "service/vocabulary/TarnReportingServerQueue.cpp",
               "client/OwnerCheck.cpp", "testing/*")
-# Locks that clang doesn't check: those of values and of the worker families, told in words; one that guards nothing of
-# its own; and the service's, which its own queue needs for changes alone.
-UNCHECKED_LOCKS = ("platform/ThreadSafety.h", "plist/*", "derived/*", "diagnostics/*", "telemetry/*", "testing/*",
-                   "tools/*", *TRIALS, "host/loop/LinuxConditions.cpp", "service/TarnReportingService.h")
+# Locks that clang doesn't check: what the checked ones are made of; those of the fakes, the tools and the tests, which
+# don't ship; and one that guards nothing of its own, since the platform's Condition hands it out.
+UNCHECKED_LOCKS = ("plist/ThreadSafety.h", "testing/*", "tools/*", *TRIALS, "host/loop/LinuxConditions.cpp")
 NOWHERE = ()
 
 
@@ -74,7 +73,8 @@ BANS = (
         "a type that owns"),
     Ban(call("malloc|calloc|realloc|free"), ("plist/*", "bench/*"), "a container"),
     Ban(r"\bstd::(?:thread|async|jthread)\b(?!::id)", (*HOST, *TRIALS, "testing/*"), "platform::WorkQueues"),
-    Ban(r"\bstd::(?:recursive_)?mutex\b", UNCHECKED_LOCKS, "platform::Mutex, whose use clang checks"),
+    Ban(r"\b(?:(?:const|mutable|static)\s+)*std::(?:(?:recursive_)?mutex|lock_guard|unique_lock|scoped_lock)\b",
+        UNCHECKED_LOCKS, "Mutex and MutexLock of plist/ThreadSafety.h, whose use clang checks"),
     Ban(call("exit|_exit|quick_exit|_Exit"), ("service/main.cpp", "tools/*", "host/*", *TRIALS),
         "platform::ProcessControl"),
     Ban(call("system|popen"), NOWHERE, "platform::CommandRunner"),
@@ -104,7 +104,7 @@ DECLARED = re.compile(r"(?<![\w])(?!(?:return|co_return|throw|else|case|do)\s)[\
 
 
 def is_declaration(code, position):
-    """Whether a type stands right before the name, as in `Outcome open(`."""
+    """Whether a type stands right before the name, as in `Status open(`."""
     start = code.rfind("\n", 0, position) + 1
     return DECLARED.search(code[start:position]) is not None
 

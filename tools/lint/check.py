@@ -1,13 +1,14 @@
 #!/usr/bin/env python3
 """Runs the checks of this folder over the tree and prints what they find, a line each. Exit 1 when there is anything.
 
-usage: check.py [include_graph|banned_calls|seeds|sizes|statics|wording ...]
+usage: check.py [include_graph|banned_calls|bodies|seeds|sizes|statics|wording ...]
 """
 
 import os
 import sys
 
 import banned_calls
+import bodies
 import include_graph
 import seeds
 import sizes
@@ -15,7 +16,8 @@ import statics
 import wording
 from tree import Tree
 
-CHECKS = {module.__name__: module.check for module in (include_graph, banned_calls, seeds, sizes, statics, wording)}
+MODULES = (include_graph, banned_calls, bodies, seeds, sizes, statics, wording)
+CHECKS = {module.__name__: module.check for module in MODULES}
 
 
 def main(names):

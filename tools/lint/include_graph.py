@@ -84,7 +84,7 @@ unordered_map unordered_set utility valarray variant vector version
 
 INCLUDE = re.compile(r'^[ \t]*#[ \t]*include[ \t]*(?:"([^"\n]+)"|<([^>\n]+)>)', re.MULTILINE)
 # Differs by compiler, not by platform.
-CONDITIONAL_HEADERS = ("platform/ThreadSafety.h",)
+CONDITIONAL_HEADERS = ("plist/ThreadSafety.h",)
 CONDITIONAL = re.compile(r"^[ \t]*#[ \t]*(?:if|ifdef|ifndef|elif)\b", re.MULTILINE)
 
 

@@ -16,7 +16,7 @@ import subprocess
 import sys
 
 ROOT = os.path.dirname(os.path.dirname(os.path.dirname(os.path.abspath(__file__))))
-# The build compiles with g++, whose own warnings clang doesn't know. What platform/ThreadSafety.h notes is for clang.
+# The build compiles with g++, whose own warnings clang doesn't know. What plist/ThreadSafety.h notes is for clang.
 EXTRA = ["--extra-arg=-Wno-unknown-warning-option", "--extra-arg=-Werror=thread-safety"]
 
 

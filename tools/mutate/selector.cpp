@@ -26,9 +26,13 @@ namespace {
 __attribute__((constructor(101))) void choose() {
   // A death test comes by its mutants in a child of this process, so the memory is shared with it.
   void* const shared = mmap(nullptr, kMostMutants, PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0);
-  if (shared != MAP_FAILED) tarn_mutant_reached = static_cast<unsigned char*>(shared);
+  if (shared != MAP_FAILED) {
+    tarn_mutant_reached = static_cast<unsigned char*>(shared);
+  }
   const char* const id = std::getenv("TARN_MUTANT");
-  if (id != nullptr) std::from_chars(id, id + std::strlen(id), tarn_mutant_chosen);
+  if (id != nullptr) {
+    std::from_chars(id, id + std::strlen(id), tarn_mutant_chosen);
+  }
 }
 
 class Reached final : public ::testing::EmptyTestEventListener {
@@ -38,7 +42,9 @@ class Reached final : public ::testing::EmptyTestEventListener {
  private:
   void OnTestStart(const ::testing::TestInfo&) override {
     // What is reached between tests, as in the initialisation of the program, counts for all of them.
-    if (!started_) tell("*", 0);
+    if (!started_) {
+      tell("*", 0);
+    }
     started_ = true;
     std::memset(tarn_mutant_reached, 0, kMostMutants);
   }
@@ -48,7 +54,9 @@ class Reached final : public ::testing::EmptyTestEventListener {
   void tell(const std::string& test, long long milliseconds) {
     out_ << test << ' ' << milliseconds;
     for (std::size_t id = 0; id < kMostMutants; ++id) {
-      if (tarn_mutant_reached[id] != 0) out_ << ' ' << id;
+      if (tarn_mutant_reached[id] != 0) {
+        out_ << ' ' << id;
+      }
     }
     out_ << '\n' << std::flush;
   }
@@ -59,8 +67,9 @@ class Reached final : public ::testing::EmptyTestEventListener {
 
 const bool kListening = [] {
   const char* const path = std::getenv("TARN_MUTANT_REACHED");
-  if (path != nullptr)
+  if (path != nullptr) {
     ::testing::UnitTest::GetInstance()->listeners().Append(std::make_unique<Reached>(path).release());
+  }
   return path != nullptr;
 }();
 

@@ -4,7 +4,8 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <system_error>
+
+#include "host/system/SystemError.h"
 
 namespace tarn::script {
 
@@ -24,9 +25,7 @@ ScriptLines::Next ScriptLines::next(std::string_view& line) {
     scanned_ = buffer_.size();
     return Next::Incomplete;
   }
-  if (!isWhole && length == 0) {
-    return Next::End;
-  }
+  if (!isWhole && length == 0) return Next::End;
   line = std::string_view(buffer_).substr(begin_, length);
   begin_ += length + (isWhole ? 1 : 0);
   scanned_ = begin_;
@@ -34,7 +33,7 @@ ScriptLines::Next ScriptLines::next(std::string_view& line) {
   return Next::Line;
 }
 
-bool ScriptLines::fill() {
+Status ScriptLines::fill() {
   buffer_.erase(0, begin_);
   scanned_ -= begin_;
   begin_ = 0;
@@ -45,12 +44,9 @@ bool ScriptLines::fill() {
     count = ::read(fd_, buffer_.data() + held, kReadBytes);
   } while (count < 0 && errno == EINTR);
   buffer_.resize(held + static_cast<std::size_t>(std::max<ssize_t>(count, 0)));
-  if (count < 0) {
-    error_ = std::generic_category().message(errno);
-    return false;
-  }
+  if (count < 0) return linux_host::lastSystemError();
   ended_ = count == 0;
-  return true;
+  return {};
 }
 
 }  // namespace tarn::script

@@ -8,6 +8,8 @@
 #include <string>
 #include <string_view>
 
+#include "plist/Result.h"
+
 namespace tarn::script {
 
 class ScriptLines {
@@ -29,12 +31,11 @@ class ScriptLines {
 
   // The next line without its line end; valid until the next call of either. The last line needs no line end.
   Next next(std::string_view& line);
-  // Reads once, waiting when there is nothing yet. On failure false, and error() says why.
-  bool fill();
+  // Reads once, waiting when there is nothing yet.
+  [[nodiscard]] Status fill();
 
   // Number of the line that next() gave last, or found too long; the first is 1.
   std::size_t lineNumber() const noexcept { return lineNumber_; }
-  const std::string& error() const noexcept { return error_; }
   int fd() const noexcept { return fd_; }
 
  private:
@@ -44,7 +45,6 @@ class ScriptLines {
   std::size_t scanned_ = 0;  // no line end lies before it
   std::size_t lineNumber_ = 0;
   bool ended_ = false;
-  std::string error_;
 };
 
 }  // namespace tarn::script

@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "host/system/JsonValues.h"
+#include "plist/formats/Json.h"
 #include "tools/script/VocabularyNames.h"
 
 namespace tarn::script {
@@ -47,7 +48,12 @@ std::string quoted(std::string_view text) {
 // What a value is, for a complaint; long ones are cut.
 std::string shown(const ValueView& value) {
   constexpr std::size_t kMaxShown = 60;
-  std::string text = value.isText() ? quoted(value.text()) : plist::description(value);
+  std::string text;
+  if (value.isText()) {
+    text = quoted(value.text());
+  } else {
+    plist::appendJson(text, value);
+  }
   if (text.size() > kMaxShown) {
     std::size_t end = kMaxShown;
     while (end > 0 && (static_cast<unsigned char>(text[end]) & 0xC0U) == 0x80U) {
@@ -64,9 +70,7 @@ bool isInteger(const ValueView& value) {
 }
 
 std::optional<std::int64_t> reporterIDFrom(const ValueView& value) {
-  if (value.kind() == Kind::Signed) {
-    return value.signedValue();
-  }
+  if (value.kind() == Kind::Signed) return value.signedValue();
   constexpr auto kMax = static_cast<std::uint64_t>(std::numeric_limits<std::int64_t>::max());
   if (value.kind() == Kind::Unsigned && value.unsignedValue() <= kMax) {
     return static_cast<std::int64_t>(value.unsignedValue());
@@ -80,7 +84,7 @@ class LineReader {
   LineReader(const plist::Dictionary& members, ScriptStep& step) : members_(members), step_(step) {}
 
   bool read() { return readOp() && readClient() && checkMembers() && readArguments(); }
-  Fault takeFault() { return Fault{std::move(fault_)}; }
+  Error fault() const { return {0, fault_}; }
 
  private:
   bool fail(std::string what, std::string_view expected) {
@@ -113,12 +117,8 @@ class LineReader {
 
 bool LineReader::readOp() {
   const ValueView op = members_.get("op");
-  if (!op.present()) {
-    return fail("there is no member \"op\"", "the name of an operation");
-  }
-  if (!op.isText()) {
-    return failMember("op", op, "the name of an operation");
-  }
+  if (!op.present()) return fail("there is no member \"op\"", "the name of an operation");
+  if (!op.isText()) return failMember("op", op, "the name of an operation");
   step_.op = op.text();
   if (step_.op == "sleep") {
     step_.kind = ScriptStep::Kind::Sleep;
@@ -143,9 +143,7 @@ bool LineReader::readClient() {
     step_.client = kDefaultClient;
     return true;
   }
-  if (!client.isText() || client.text().empty()) {
-    return failMember("client", client, "a text that names a connection");
-  }
+  if (!client.isText() || client.text().empty()) return failMember("client", client, "a text that names a connection");
   step_.client = client.text();
   return true;
 }
@@ -162,12 +160,18 @@ bool LineReader::checkMembers() {
   std::optional<std::string_view> missing;
   const auto note = [&](std::string_view name, bool isNeeded) {
     taken += ", " + quoted(name);
-    if (isNeeded && !missing && !members_.contains(name)) missing = name;
+    if (isNeeded && !missing && !members_.contains(name)) {
+      missing = name;
+    }
   };
   for (const ArgumentRow& row : wire::kArguments) {
-    if (takes(row)) note(row.name, !mayBeLeftOut(row));
+    if (takes(row)) {
+      note(row.name, !mayBeLeftOut(row));
+    }
   }
-  if (takesSeconds()) note(kSeconds, true);
+  if (takesSeconds()) {
+    note(kSeconds, true);
+  }
   for (const auto& entry : members_) {
     if (!takesMember(entry.key.text())) {
       return fail(step_.op + " has no member " + quoted(entry.key.text()), "only " + taken);
@@ -188,27 +192,19 @@ bool LineReader::readArguments() {
 bool LineReader::read(const ArgumentRow& row, std::int64_t& number) {
   const ValueView value = members_.get(row.name);
   const auto found = reporterIDFrom(value);
-  if (!found) {
-    return failMember(row.name, value, "an integer from -2^63 to 2^63-1");
-  }
+  if (!found) return failMember(row.name, value, "an integer from -2^63 to 2^63-1");
   number = *found;
   return true;
 }
 
 bool LineReader::read(const ArgumentRow& row, wire::ReporterIDs& numbers) {
   const ValueView value = members_.get(row.name);
-  if (!value.present()) {
-    return true;
-  }
-  if (value.kind() != Kind::Array) {
-    return failMember(row.name, value, "an array of integers");
-  }
+  if (!value.present()) return true;
+  if (value.kind() != Kind::Array) return failMember(row.name, value, "an array of integers");
   numbers.emplace();
   for (const ValueView item : value.array()) {
     const auto number = reporterIDFrom(item);
-    if (!number) {
-      return failMember(row.name, value, "an array of integers from -2^63 to 2^63-1");
-    }
+    if (!number) return failMember(row.name, value, "an array of integers from -2^63 to 2^63-1");
     numbers->push_back(*number);
   }
   return true;
@@ -226,9 +222,7 @@ bool LineReader::readSeconds() {
 
 bool LineReader::read(const ArgumentRow& row, plist::Dictionary& dictionary) {
   const ValueView value = members_.get(row.name);
-  if (value.kind() != Kind::Dictionary) {
-    return failMember(row.name, value, "an object");
-  }
+  if (value.kind() != Kind::Dictionary) return failMember(row.name, value, "an object");
   dictionary = value.dictionary();
   return true;
 }
@@ -253,25 +247,24 @@ bool LineReader::read(const ArgumentRow& row, Number& number) {
 
 }  // namespace
 
-std::variant<ScriptStep, Fault> parseLine(std::string_view text, std::size_t line) {
+Result<ScriptStep> parseLine(std::string_view text, std::size_t line) {
   // A line's own object is one level more than its values may have.
   const linux_host::JsonReading reading = linux_host::readJson(text, linux_host::kMaximumJsonNesting + 1);
   if (reading.fault) {
-    return Fault{"column " + std::to_string(reading.fault->column) + ": " + reading.fault->text +
-                 ", expected one JSON object a line"};
+    return {{},
+            Error{0, "column " + std::to_string(reading.fault->column) + ": " + reading.fault->text +
+                         ", expected one JSON object a line"}};
   }
   const ValueView object = reading.value;
   if (object.kind() != Kind::Dictionary) {
-    return Fault{"the line is " + shown(object) + ", expected a JSON object: {\"op\": ...}"};
+    return {{}, Error{0, "the line is " + shown(object) + ", expected a JSON object: {\"op\": ...}"}};
   }
   ScriptStep step;
   step.line = line;
   const plist::Dictionary members = object.dictionary();
   LineReader reader(members, step);
-  if (!reader.read()) {
-    return reader.takeFault();
-  }
-  return step;
+  if (!reader.read()) return {{}, reader.fault()};
+  return {std::move(step), {}};
 }
 
 bool isBlank(std::string_view text) noexcept {

@@ -9,21 +9,15 @@
 #pragma once
 
 #include <cstddef>
-#include <string>
 #include <string_view>
-#include <variant>
 
+#include "plist/Result.h"
 #include "tools/script/ScriptStep.h"
 
 namespace tarn::script {
 
-// What is wrong with a line, for a person to read.
-struct Fault {
-  std::string text;
-};
-
-// The step that `text`, line number `line` of its script, stands for.
-std::variant<ScriptStep, Fault> parseLine(std::string_view text, std::size_t line);
+// The step that `text`, line number `line` of its script, stands for, or what is wrong with it.
+Result<ScriptStep> parseLine(std::string_view text, std::size_t line);
 
 // Whether the line holds nothing but white space; such lines are passed over.
 bool isBlank(std::string_view text) noexcept;

@@ -6,9 +6,7 @@ namespace tarn::script {
 
 std::optional<std::uint64_t> NameTable::numberOf(std::string_view name) const {
   const std::uint64_t number = parser_(name);
-  if (number == parser_(fallbackName_) && name != fallbackName_) {
-    return std::nullopt;
-  }
+  if (number == parser_(fallbackName_) && name != fallbackName_) return std::nullopt;
   return number;
 }
 

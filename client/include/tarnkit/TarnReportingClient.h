@@ -32,7 +32,7 @@
 #include <tarnkit/Requests.h>
 
 namespace tarn::client {
-class TarnReportingClient;
+class ClientConnection;
 }
 
 namespace tarnkit {
@@ -51,7 +51,7 @@ class TarnReportingClient {
   static Connected connect(const std::string& path, const Options& options = {});
 
   // The library's own.
-  explicit TarnReportingClient(std::unique_ptr<tarn::client::TarnReportingClient> client);
+  explicit TarnReportingClient(std::unique_ptr<tarn::client::ClientConnection> client);
   // Closes.
   ~TarnReportingClient();
   TarnReportingClient(const TarnReportingClient&) = delete;
@@ -90,7 +90,7 @@ class TarnReportingClient {
   void close();
 
  private:
-  std::unique_ptr<tarn::client::TarnReportingClient> client_;
+  std::unique_ptr<tarn::client::ClientConnection> client_;
 };
 
 }  // namespace tarnkit

@@ -76,7 +76,7 @@ class Listener final : public JsonListener {
   std::vector<Event>& events() { return events_; }
   std::vector<std::string> takeTexts() { return texts_.take(); }
   bool foundEvents() const { return eventsDepth_ != 0; }
-  const std::string& failure() const { return failure_; }
+  const Status& failure() const { return failure_; }
 
   bool beginObject() override {
     if (++depth_ == eventsDepth_ + 1 && inEvents_) {
@@ -105,7 +105,9 @@ class Listener final : public JsonListener {
     return isWithinDepth();
   }
   bool endArray() override {
-    if (depth_-- == eventsDepth_) inEvents_ = false;
+    if (depth_-- == eventsDepth_) {
+      inEvents_ = false;
+    }
     return true;
   }
   bool text(std::string_view text) override {
@@ -123,9 +125,15 @@ class Listener final : public JsonListener {
   }
   bool number(const Number& number) override {
     if (!isOfEvent()) return true;
-    if (member_ == Member::Process && number.isWhole) event_.process = number.whole;
-    if (member_ == Member::Thread && number.isWhole) event_.thread = number.whole;
-    if (member_ == Member::Time || member_ == Member::Duration) takeTime(number.value);
+    if (member_ == Member::Process && number.isWhole) {
+      event_.process = number.whole;
+    }
+    if (member_ == Member::Thread && number.isWhole) {
+      event_.thread = number.whole;
+    }
+    if (member_ == Member::Time || member_ == Member::Duration) {
+      takeTime(number.value);
+    }
     return true;
   }
 
@@ -133,7 +141,7 @@ class Listener final : public JsonListener {
   bool isOfEvent() const { return inEvents_ && depth_ == eventsDepth_ + 1; }
   bool isWithinDepth() {
     if (depth_ <= limits_.mostDepth) return true;
-    failure_ = "its values nest too deep";
+    failure_ = Error{0, "its values nest too deep"};
     return false;
   }
   void takeTime(double microseconds) {
@@ -150,10 +158,12 @@ class Listener final : public JsonListener {
   bool keepEvent() {
     const bool isComplete = event_.phase == 'X' && event_.hasDuration && event_.duration >= 0 && event_.hasName;
     const bool isPart = (event_.phase == 'B' && event_.hasName) || event_.phase == 'E';
-    if (!hasSubsystem_) event_.subsystem = texts_.number({});
+    if (!hasSubsystem_) {
+      event_.subsystem = texts_.number({});
+    }
     if (!event_.hasTime || !(isComplete || isPart)) return true;
     if (events_.size() >= limits_.mostEvents) {
-      failure_ = "it has more than " + std::to_string(limits_.mostEvents) + " events";
+      failure_ = Error{0, "it has more than " + std::to_string(limits_.mostEvents) + " events"};
       return false;
     }
     events_.push_back(event_);
@@ -170,7 +180,7 @@ class Listener final : public JsonListener {
   Event event_;
   std::vector<Event> events_;
   Texts texts_;
-  std::string failure_;
+  Status failure_;
 };
 
 // The begins of one thread that have no end yet, innermost last. How many of each name there are is counted, so that an
@@ -225,14 +235,16 @@ std::vector<Interval> intervalsOf(std::vector<Event>& events) {
   return intervals;
 }
 
-ReadTrace systemFailure(int number) {
-  return {{}, number, std::generic_category().message(number)};
+Result<ChromeTrace> systemFailure(int number) {
+  return {{}, Error{number, std::generic_category().message(number)}};
 }
 
 struct Descriptor {
   explicit Descriptor(int opened) : number(opened) {}
   ~Descriptor() {
-    if (number >= 0) ::close(number);
+    if (number >= 0) {
+      ::close(number);
+    }
   }
   Descriptor(const Descriptor&) = delete;
   Descriptor& operator=(const Descriptor&) = delete;
@@ -242,23 +254,25 @@ struct Descriptor {
 
 }  // namespace
 
-ReadTrace parseTrace(std::string_view bytes, const TraceLimits& limits) {
+Result<ChromeTrace> parseTrace(std::string_view bytes, const TraceLimits& limits) {
   if (bytes.size() > limits.mostBytes) return systemFailure(EFBIG);
-  ReadTrace read;
+  Result<ChromeTrace> read;
   Listener listener(limits);
   if (const auto position = scanJson(bytes, listener)) {
-    read.failure = listener.failure();
-    if (read.failure.empty()) read.failure = "it is no whole JSON text: at byte " + std::to_string(*position);
+    read.error = listener.failure();
+    if (read.ok()) {
+      read.error = Error{0, "it is no whole JSON text: at byte " + std::to_string(*position)};
+    }
   } else if (!listener.foundEvents()) {
-    read.failure = "it has no array of trace events";
+    read.error = Error{0, "it has no array of trace events"};
   } else {
-    read.trace.intervals = intervalsOf(listener.events());
-    read.trace.texts = listener.takeTexts();
+    read.value.intervals = intervalsOf(listener.events());
+    read.value.texts = listener.takeTexts();
   }
   return read;
 }
 
-ReadTrace readTrace(const std::string& path, const TraceLimits& limits) {
+Result<ChromeTrace> readTrace(const std::string& path, const TraceLimits& limits) {
   // Not blocking, for the case that somebody put a pipe there.
   const Descriptor file(::open(path.c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC));
   if (file.number < 0) return systemFailure(errno);

@@ -15,6 +15,8 @@
 #include <string_view>
 #include <vector>
 
+#include "plist/Result.h"
+
 namespace tarn::trace_analysis {
 
 struct TraceLimits {
@@ -35,14 +37,8 @@ struct ChromeTrace {
   std::vector<Interval> intervals;  // in the order of their begins, an outer one before those inside it
 };
 
-struct ReadTrace {
-  ChromeTrace trace;
-  std::int64_t code = 0;  // of the failure: the system's number, or 0
-  std::string failure;    // empty: it was read
-};
-
-ReadTrace readTrace(const std::string& path, const TraceLimits& limits = {});
+Result<ChromeTrace> readTrace(const std::string& path, const TraceLimits& limits = {});
 // The same of bytes in memory.
-ReadTrace parseTrace(std::string_view bytes, const TraceLimits& limits = {});
+Result<ChromeTrace> parseTrace(std::string_view bytes, const TraceLimits& limits = {});
 
 }  // namespace tarn::trace_analysis

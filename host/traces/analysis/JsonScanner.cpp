@@ -38,19 +38,13 @@ std::size_t sequenceBytes(std::string_view text) noexcept {
   const auto byte = [&](std::size_t i) { return static_cast<unsigned char>(text[i]); };
   const unsigned first = byte(0);
   const std::size_t bytes = first >= 0xF0 ? 4 : first >= 0xE0 ? 3 : 2;
-  if (first < 0xC2 || first > 0xF4 || text.size() < bytes) {
-    return 0;
-  }
+  if (first < 0xC2 || first > 0xF4 || text.size() < bytes) return 0;
   // No longer than need be, no surrogate, none behind the last character.
   const unsigned least = first == 0xE0 ? 0xA0 : first == 0xF0 ? 0x90 : 0x80;
   const unsigned most = first == 0xED ? 0x9F : first == 0xF4 ? 0x8F : 0xBF;
-  if (byte(1) < least || byte(1) > most) {
-    return 0;
-  }
+  if (byte(1) < least || byte(1) > most) return 0;
   for (std::size_t i = 2; i < bytes; ++i) {
-    if (byte(i) < 0x80 || byte(i) > 0xBF) {
-      return 0;
-    }
+    if (byte(i) < 0x80 || byte(i) > 0xBF) return 0;
   }
   return bytes;
 }
@@ -103,7 +97,9 @@ class Scanner {
 
  private:
   void skipBlanks() {
-    while (at_ != end_ && (*at_ == ' ' || *at_ == '\n' || *at_ == '\r' || *at_ == '\t')) ++at_;
+    while (at_ != end_ && (*at_ == ' ' || *at_ == '\n' || *at_ == '\r' || *at_ == '\t')) {
+      ++at_;
+    }
   }
   bool take(char character) {
     if (at_ == end_ || *at_ != character) return false;
@@ -176,7 +172,9 @@ class Scanner {
   // The text up to the quotation mark, which is taken too.
   bool takeText(std::string_view& text) {
     const char* const begin = at_;
-    while (at_ != end_ && isPlain(*at_)) ++at_;
+    while (at_ != end_ && isPlain(*at_)) {
+      ++at_;
+    }
     text = std::string_view(begin, static_cast<std::size_t>(at_ - begin));
     if (take('"')) return true;
     decoded_.assign(text);
@@ -229,7 +227,9 @@ class Scanner {
 
   bool takeDigits() {
     const char* const begin = at_;
-    while (at_ != end_ && isDigit(*at_)) ++at_;
+    while (at_ != end_ && isDigit(*at_)) {
+      ++at_;
+    }
     return at_ != begin;
   }
   bool takeNumber() {
@@ -244,7 +244,9 @@ class Scanner {
     }
     if (take('e') || take('E')) {
       number.isWhole = false;
-      if (!take('+')) static_cast<void>(take('-'));
+      if (!take('+')) {
+        static_cast<void>(take('-'));
+      }
       if (!takeDigits()) return false;
     }
     if (std::from_chars(begin, at_, number.value).ec != std::errc()) {

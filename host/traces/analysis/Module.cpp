@@ -12,8 +12,6 @@ namespace tarn::trace_analysis {
 
 namespace {
 
-using platform::Outcome;
-using platform::PlatformError;
 using platform::SignpostInterval;
 using platform::TraceProbe;
 
@@ -30,14 +28,16 @@ class Model final : public platform::TraceModel {
  public:
   explicit Model(ChromeTrace trace) : trace_(std::move(trace)) {}
 
-  Outcome<std::vector<SignpostInterval>> allSignpostIntervals() override {
+  Result<std::vector<SignpostInterval>> allSignpostIntervals() override {
     try {
       std::vector<SignpostInterval> intervals;
       intervals.reserve(trace_.intervals.size());
-      for (std::size_t i = 0; i < trace_.intervals.size(); ++i) intervals.push_back(intervalAt(trace_, i));
+      for (std::size_t i = 0; i < trace_.intervals.size(); ++i) {
+        intervals.push_back(intervalAt(trace_, i));
+      }
       return {std::move(intervals), {}};
     } catch (const std::exception& error) {
-      return {{}, PlatformError{0, error.what()}};
+      return {{}, Error{0, error.what()}};
     }
   }
 
@@ -54,7 +54,9 @@ std::vector<TraceProbe> madeOf(const std::vector<Probe>& probes, const ChromeTra
     TraceProbe& one = made.emplace_back();
     one = {probe.name, kind, probe.measuresIntervals, {}, madeOf(probe.children, trace)};
     one.events.reserve(probe.events.size());
-    for (const std::uint32_t event : probe.events) one.events.push_back(intervalAt(trace, event));
+    for (const std::uint32_t event : probe.events) {
+      one.events.push_back(intervalAt(trace, event));
+    }
   }
   return made;
 }
@@ -63,13 +65,13 @@ class Library final : public platform::TraceAnalysisLibrary {
  public:
   explicit Library(Host host) : host_(std::move(host)) {}
 
-  Outcome<std::shared_ptr<platform::TraceModel>> openTrace(std::string_view location) override {
+  Result<std::shared_ptr<platform::TraceModel>> openTrace(std::string_view location) override {
     try {
       auto read = readTrace(std::string(location));
-      if (!read.failure.empty()) return {nullptr, PlatformError{read.code, std::move(read.failure)}};
-      return {std::make_shared<Model>(std::move(read.trace)), {}};
+      if (read.failed()) return {nullptr, std::move(read.error)};
+      return {std::make_shared<Model>(std::move(read.value)), {}};
     } catch (const std::exception& error) {
-      return {nullptr, PlatformError{0, error.what()}};
+      return {nullptr, Error{0, error.what()}};
     }
   }
 
@@ -79,8 +81,8 @@ class Library final : public platform::TraceAnalysisLibrary {
     if (model == nullptr) return {};  // not one that this library opened
     try {
       const auto read = probesFor(host_.jsonOf(descriptions), model->trace());
-      if (read.failure.empty()) return madeOf(read.probes, model->trace());
-      host_.refuse(read.failure);
+      if (read.ok()) return madeOf(read.value, model->trace());
+      host_.refuse(read.error->text);
     } catch (const std::exception& error) {
       host_.refuse(error.what());
     }

@@ -20,16 +20,18 @@ class Reader {
   std::vector<Probe> probesOf(const Json& descriptions, std::size_t depth) {
     std::vector<Probe> probes;
     if (depth > limits_.mostDepth) {
-      failure_ = "probes nest more than " + std::to_string(limits_.mostDepth) + " deep";
+      failure_ = Error{0, "probes nest more than " + std::to_string(limits_.mostDepth) + " deep"};
       return probes;
     }
     for (const Json& description : descriptions) {
-      if (!failure_.empty()) break;
-      if (auto probe = probeOf(description, depth)) probes.push_back(std::move(*probe));
+      if (failure_.failed()) break;
+      if (auto probe = probeOf(description, depth)) {
+        probes.push_back(std::move(*probe));
+      }
     }
     return probes;
   }
-  const std::string& failure() const { return failure_; }
+  const Status& failure() const { return failure_; }
 
  private:
   // A text under the key; `fallback` when it isn't there, nothing when something else is.
@@ -51,12 +53,16 @@ class Reader {
     if (!name || name->empty() || !kind || !subsystem || !signpost || childrenAreWrong) return std::nullopt;
     if (*kind != "SkeinSignpostIntervalProbe" && *kind != "SkeinProbe") return std::nullopt;
     if (++probes_ > limits_.mostProbes) {
-      failure_ = "there are more than " + std::to_string(limits_.mostProbes) + " probes";
+      failure_ = Error{0, "there are more than " + std::to_string(limits_.mostProbes) + " probes"};
       return std::nullopt;
     }
     Probe probe{*name, *kind == "SkeinSignpostIntervalProbe", {}, {}};
-    if (probe.measuresIntervals) probe.events = eventsOf(*subsystem, *signpost);
-    if (children != description.end()) probe.children = probesOf(*children, depth + 1);
+    if (probe.measuresIntervals) {
+      probe.events = eventsOf(*subsystem, *signpost);
+    }
+    if (children != description.end()) {
+      probe.children = probesOf(*children, depth + 1);
+    }
     return probe;
   }
 
@@ -78,7 +84,7 @@ class Reader {
       const Interval& interval = trace_.intervals[i];
       if (!subsystems[interval.subsystem] || !names[interval.name]) continue;
       if (++events_ > limits_.mostEvents) {
-        failure_ = "the probes have more than " + std::to_string(limits_.mostEvents) + " events";
+        failure_ = Error{0, "the probes have more than " + std::to_string(limits_.mostEvents) + " events"};
         return {};
       }
       events.push_back(static_cast<std::uint32_t>(i));
@@ -90,18 +96,21 @@ class Reader {
   const ProbeLimits limits_;
   std::size_t probes_ = 0;
   std::size_t events_ = 0;
-  std::string failure_;
+  Status failure_;
 };
 
 }  // namespace
 
-ReadProbes probesFor(std::string_view descriptions, const ChromeTrace& trace, const ProbeLimits& limits) {
-  if (descriptions.size() > kMostDescriptionBytes) return {{}, "the descriptions are too large"};
+Result<std::vector<Probe>> probesFor(std::string_view descriptions, const ChromeTrace& trace,
+                                     const ProbeLimits& limits) {
+  if (descriptions.size() > kMostDescriptionBytes) return {{}, Error{0, "the descriptions are too large"}};
   const Json parsed = Json::parse(descriptions, nullptr, false);
-  if (!parsed.is_array()) return {{}, "the descriptions are no JSON array"};
+  if (!parsed.is_array()) return {{}, Error{0, "the descriptions are no JSON array"}};
   Reader reader(trace, limits);
-  ReadProbes read{reader.probesOf(parsed, 1), reader.failure()};
-  if (!read.failure.empty()) read.probes.clear();
+  Result<std::vector<Probe>> read{reader.probesOf(parsed, 1), reader.failure()};
+  if (read.failed()) {
+    read.value.clear();
+  }
   return read;
 }
 
@@ -124,7 +133,9 @@ bool matchesPattern(std::string_view pattern, std::string_view text) noexcept {
       return false;
     }
   }
-  while (at < pattern.size() && pattern[at] == '*') ++at;
+  while (at < pattern.size() && pattern[at] == '*') {
+    ++at;
+  }
   return at == pattern.size();
 }
 

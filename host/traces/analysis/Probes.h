@@ -22,6 +22,7 @@
 #include <vector>
 
 #include "host/traces/analysis/ChromeTrace.h"
+#include "plist/Result.h"
 
 namespace tarn::trace_analysis {
 
@@ -38,13 +39,10 @@ struct Probe {
   std::vector<Probe> children;
 };
 
-struct ReadProbes {
-  std::vector<Probe> probes;
-  std::string failure;  // empty: they were read; else the text is no array, or it asks for more than the limits allow
-};
-
-// The probes that a JSON array of descriptions asks for.
-ReadProbes probesFor(std::string_view descriptions, const ChromeTrace& trace, const ProbeLimits& limits = {});
+// The probes that a JSON array of descriptions asks for. It fails when the text is no array, or asks for more than the
+// limits allow.
+Result<std::vector<Probe>> probesFor(std::string_view descriptions, const ChromeTrace& trace,
+                                     const ProbeLimits& limits = {});
 
 // Whether the whole text matches; takes at most as many steps as the product of both lengths.
 bool matchesPattern(std::string_view pattern, std::string_view text) noexcept;

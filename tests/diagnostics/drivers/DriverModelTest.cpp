@@ -39,9 +39,15 @@ std::string stripped(const std::string& name) {
 
 std::string keyOf(const FlumeChannelName& name, const std::string& type) {
   std::string key;
-  if (name.driver) key += stripped(name.driver->substr(0, name.driver->find("<"))) + "_";
-  if (name.group) key += stripped(*name.group) + "_";
-  if (name.subGroup) key += stripped(*name.subGroup) + "_";
+  if (name.driver) {
+    key += stripped(name.driver->substr(0, name.driver->find("<"))) + "_";
+  }
+  if (name.group) {
+    key += stripped(*name.group) + "_";
+  }
+  if (name.subGroup) {
+    key += stripped(*name.subGroup) + "_";
+  }
   return key + type + "_" + stripped(*name.name);
 }
 
@@ -59,7 +65,9 @@ const FlumeChannel* firstOf(const FlumeSamples& samples, const FlumeChannelName&
 
 void expectSimple(const FlumeChannel& later, const FlumeChannel* earlier, Expected& expected) {
   const std::int64_t value = earlier == nullptr ? later.value : later.value - earlier->value;
-  if (value > 0) expected.simple[keyOf(later.name, "Simple")] = value;
+  if (value > 0) {
+    expected.simple[keyOf(later.name, "Simple")] = value;
+  }
 }
 
 void expectHistogram(const FlumeChannel& later, const FlumeChannel* earlier, Expected& expected) {
@@ -72,10 +80,16 @@ void expectHistogram(const FlumeChannel& later, const FlumeChannel* earlier, Exp
     if (earlier != nullptr && i < earlier->buckets.size() && earlier->buckets[i].hits <= hits) {
       hits -= earlier->buckets[i].hits;
     }
-    if (bucket.lower < lower) lower = bucket.lower;
-    if (bucket.upper > upper) upper = bucket.upper;
+    if (bucket.lower < lower) {
+      lower = bucket.lower;
+    }
+    if (bucket.upper > upper) {
+      upper = bucket.upper;
+    }
     if (hits == 0) continue;
-    if (!buckets.empty()) buckets += ";";
+    if (!buckets.empty()) {
+      buckets += ";";
+    }
     buckets += std::to_string(bucket.lower) + "-" + std::to_string(bucket.upper) + ":" + std::to_string(hits);
   }
   if (buckets.empty()) return;
@@ -93,8 +107,12 @@ void expectState(const FlumeChannel& later, const FlumeChannel* earlier, Expecte
     if (earlier != nullptr) {
       for (const FlumeState& before : earlier->states) {
         if (before.name != state.name) continue;
-        if (before.transitions <= transitions) transitions -= before.transitions;
-        if (before.residency <= residency) residency -= before.residency;
+        if (before.transitions <= transitions) {
+          transitions -= before.transitions;
+        }
+        if (before.residency <= residency) {
+          residency -= before.residency;
+        }
       }
     }
     if (residency == 0) continue;
@@ -104,7 +122,9 @@ void expectState(const FlumeChannel& later, const FlumeChannel* earlier, Expecte
                   state.dutyCycle);
     text += line;
   }
-  if (!text.empty()) expected.state[keyOf(later.name, "State")] = text;
+  if (!text.empty()) {
+    expected.state[keyOf(later.name, "State")] = text;
+  }
 }
 
 // Groups and channels in the order in which they are walked, so that of equal keys the last one stands.
@@ -126,10 +146,18 @@ Expected expectedOf(const FlumeSamples& first, const FlumeSamples& start, const 
         continue;
       }
       const FlumeChannel* earlier = firstOf(start, known.name);
-      if (earlier != nullptr && earlier->format != later->format) earlier = nullptr;
-      if (later->format == FlumeFormat::Simple) expectSimple(*later, earlier, expected);
-      if (later->format == FlumeFormat::Histogram) expectHistogram(*later, earlier, expected);
-      if (later->format == FlumeFormat::State) expectState(*later, earlier, expected);
+      if (earlier != nullptr && earlier->format != later->format) {
+        earlier = nullptr;
+      }
+      if (later->format == FlumeFormat::Simple) {
+        expectSimple(*later, earlier, expected);
+      }
+      if (later->format == FlumeFormat::Histogram) {
+        expectHistogram(*later, earlier, expected);
+      }
+      if (later->format == FlumeFormat::State) {
+        expectState(*later, earlier, expected);
+      }
     }
   }
   return expected;
@@ -146,14 +174,18 @@ class Drawing {
 
   FlumeSamples channels() {
     FlumeSamples drawn(static_cast<std::size_t>(below(12)));
-    for (FlumeChannel& channel : drawn) channel = fresh();
+    for (FlumeChannel& channel : drawn) {
+      channel = fresh();
+    }
     return drawn;
   }
   // Time passes: channels count on, begin anew, change, vanish and appear.
   FlumeSamples later(FlumeSamples channels) {
     for (FlumeChannel& channel : channels) {
       channel.value += below(7) - 2;
-      for (FlumeBucket& bucket : channel.buckets) bucket.hits = below(6) == 0 ? below(3) : bucket.hits + below(3);
+      for (FlumeBucket& bucket : channel.buckets) {
+        bucket.hits = below(6) == 0 ? below(3) : bucket.hits + below(3);
+      }
       for (FlumeState& state : channel.states) {
         state.transitions = below(6) == 0 ? 0 : state.transitions + static_cast<std::uint64_t>(below(3));
         state.residency = below(6) == 0 ? 1 : state.residency + static_cast<std::uint64_t>(below(3) * 100);
@@ -164,13 +196,25 @@ class Drawing {
         changed.name = channel.name;
         channel = changed;
       }
-      if (below(4) == 0) std::reverse(channel.states.begin(), channel.states.end());
-      if (below(8) == 0 && !channel.buckets.empty()) channel.buckets.pop_back();
-      if (below(8) == 0) channel.buckets.push_back({below(100) - 50, below(100), below(5)});
+      if (below(4) == 0) {
+        std::reverse(channel.states.begin(), channel.states.end());
+      }
+      if (below(8) == 0 && !channel.buckets.empty()) {
+        channel.buckets.pop_back();
+      }
+      if (below(8) == 0) {
+        channel.buckets.push_back({below(100) - 50, below(100), below(5)});
+      }
     }
-    if (below(4) == 0 && !channels.empty()) channels.erase(channels.begin());
-    if (below(4) == 0) channels.insert(channels.begin(), fresh());
-    if (below(3) == 0) std::shuffle(channels.begin(), channels.end(), random_);
+    if (below(4) == 0 && !channels.empty()) {
+      channels.erase(channels.begin());
+    }
+    if (below(4) == 0) {
+      channels.insert(channels.begin(), fresh());
+    }
+    if (below(3) == 0) {
+      std::shuffle(channels.begin(), channels.end(), random_);
+    }
     return channels;
   }
 
@@ -186,7 +230,9 @@ class Drawing {
     channel.value = below(100) - 30;
     channel.minimum = below(10) - 5;
     channel.maximum = below(1000);
-    for (int i = below(5); i > 0; --i) channel.buckets.push_back({below(100) - 50, below(100), below(5)});
+    for (int i = below(5); i > 0; --i) {
+      channel.buckets.push_back({below(100) - 50, below(100), below(5)});
+    }
     std::vector<std::string> names = {"on", "off", "idle", ""};
     for (int i = below(4); i > 0; --i) {
       const std::string name = of(names);

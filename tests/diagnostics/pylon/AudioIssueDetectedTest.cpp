@@ -10,8 +10,8 @@
 #include <utility>
 
 #include "diagnostics/pylon/CityHash64.h"
+#include "diagnostics/pylon/ProtobufText.h"
 #include "diagnostics/pylon/TextFields.h"
-#include "diagnostics/pylon/TextLines.h"
 #include "diagnostics/pylon/WireWriter.h"
 #include "plist/formats/Json.h"
 
@@ -211,7 +211,7 @@ TEST(AudioIssueDetected, TextIsAlphabeticalAndLeavesOutATimestampThatIsNotSet) {
   record.setDuration(-2);
   record.setIssuetype("gl\"it\\ch\n\x01");
   record.setNode("d\xc3\xa9j\xc3\xa0");
-  TextLines lines;
+  ProtobufText lines;
   record.formatText(lines, "issue");
   EXPECT_EQ(lines.text(),
             "issue {\n"
@@ -225,7 +225,7 @@ TEST(AudioIssueDetected, TextIsAlphabeticalAndLeavesOutATimestampThatIsNotSet) {
 TEST(AudioIssueDetected, TextEndsWithATimestampThatIsSet) {
   AudioIssueDetected record;
   record.setTimestamp(std::numeric_limits<std::uint64_t>::max());
-  TextLines lines;
+  ProtobufText lines;
   record.formatText(lines, "issue");
   EXPECT_TRUE(lines.text().ends_with("  rtaidclient: \"\"\n  timestamp: 18446744073709551615\n}\n")) << lines.text();
 }
@@ -242,13 +242,13 @@ TEST(AudioIssueDetected, FieldsOfTheTextKeepTheirNamesAndOrder) {
 }
 
 TEST(AudioIssueDetected, CharactersThatAreNotPrintableAreEscaped) {
-  TextLines lines;
+  ProtobufText lines;
   lines.formatString("s", "\x1f \x7e\x7f\x80\xff\r\t'");
   EXPECT_EQ(lines.text(), "s: \"\\037 ~\\177\\200\\377\\r\\t\\'\"\n");
 }
 
 TEST(AudioIssueDetected, ObjectsWithinObjectsAreIndentedByTwo) {
-  TextLines lines;
+  ProtobufText lines;
   lines.beginObject("outer");
   lines.beginObject("inner");
   lines.formatUnsigned("n", 1);

@@ -12,9 +12,7 @@ using Bytes = std::deque<unsigned char>;
 struct Cut {};
 
 unsigned char take(Bytes& bytes) {
-  if (bytes.empty()) {
-    throw Cut();
-  }
+  if (bytes.empty()) throw Cut();
   const unsigned char byte = bytes.front();
   bytes.pop_front();
   return byte;
@@ -59,9 +57,7 @@ void takeUnknown(Bytes& bytes, std::uint64_t number, std::uint64_t type, int dep
     for (;;) {
       const std::uint64_t tag = takeVarint(bytes);
       if (tag % 8 == 4) {
-        if (tag / 8 == number) {
-          return;
-        }
+        if (tag / 8 == number) return;
         throw Cut();
       }
       takeUnknown(bytes, tag / 8, tag % 8, depth + 1);
@@ -71,12 +67,10 @@ void takeUnknown(Bytes& bytes, std::uint64_t number, std::uint64_t type, int dep
   }
 }
 
-// Whether it goes on behind this field.
+// Whether it goes on after this field.
 bool takeField(Bytes& bytes, ModelIssue& issue) {
   const std::uint64_t tag = takeVarint(bytes);
-  if (tag % 8 == 4) {
-    return false;
-  }
+  if (tag % 8 == 4) return false;
   if (tag / 8 == 1) {
     issue.timestamp = 0;
     issue.timestamp = takeVarint(bytes);

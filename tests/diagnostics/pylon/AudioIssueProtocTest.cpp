@@ -9,7 +9,7 @@
 #include <vector>
 
 #include "diagnostics/pylon/AudioIssueDetected.h"
-#include "diagnostics/pylon/TextLines.h"
+#include "diagnostics/pylon/ProtobufText.h"
 #include "diagnostics/pylon/WireReader.h"
 #include "diagnostics/pylon/WireWriter.h"
 #include "host/machine/LinuxCommandRunner.h"
@@ -31,7 +31,7 @@ std::string written(const AudioIssueDetected& record) {
 }
 
 std::string textOf(const AudioIssueDetected& record) {
-  TextLines lines;
+  ProtobufText lines;
   record.formatText(lines, "record");
   return lines.text();
 }

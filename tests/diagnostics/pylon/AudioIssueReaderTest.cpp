@@ -261,7 +261,7 @@ TEST(AudioIssueReader, EveryPrefixOfARecordIsReadWithoutHarm) {
   for (std::size_t size = 0; size <= writer.bytes().size(); ++size) {
     good += read(writer.bytes().substr(0, size)).good ? 1U : 0U;
   }
-  EXPECT_EQ(good, 6U);  // before the first field and behind each of the five
+  EXPECT_EQ(good, 6U);  // before the first field and after each of the five
 }
 
 // The reader by itself.

@@ -50,9 +50,7 @@ class SnareFixture : public SessionFixture {
   // The state of the session's instance of this class.
   static WorkerInstanceState& stateOf(const Session& session, std::string_view instanceName) {
     for (const Worker::Member& member : workerOf(session)->instances()) {
-      if (member.instanceClass.name == instanceName) {
-        return member.instance->workerState();
-      }
+      if (member.instanceClass.name == instanceName) return member.instance->workerState();
     }
     ADD_FAILURE() << "no instance of " << instanceName;
     static WorkerInstanceState none;
@@ -81,9 +79,7 @@ class SnareFixture : public SessionFixture {
   // Whether this line was logged in the Snare worker's category.
   bool logged(LogLevel level, std::string_view module, std::string_view text) const {
     for (const RecordingLog::Entry& entry : platform_.log.entries(level)) {
-      if (entry.category == "tarnrb" && entry.module == module && entry.message() == text) {
-        return true;
-      }
+      if (entry.category == "tarnrb" && entry.module == module && entry.message() == text) return true;
     }
     return false;
   }

@@ -487,13 +487,14 @@ TEST_F(SnareOrder, AStuckSoundIsAskedForUnderTheLockWithTheLimitBegun) {
   TarnReportingSnareProcessState::RateLimit& limit = TarnReportingSnareProcessState::shared()->systemSoundRateLimit();
   std::optional<double> lastFire;
   bool locked = false;
-  platform_.order.start([&](const std::string& entry) {
+  platform_.order.start([&](const std::string& entry) TARN_UNCHECKED {  // by whoever holds the lock
     if (entry == "snare snapshot") {
       lastFire = limit.lastFire;
       std::thread([&] {
-        locked = !limit.lock.try_lock();
-        if (!locked) {
+        if (limit.lock.tryLock()) {
           limit.lock.unlock();
+        } else {
+          locked = true;
         }
       }).join();
     }
@@ -555,7 +556,9 @@ TEST_F(SnareOrder, AnInstanceBehindItsSessionAsksForNothing) {
   haptics.fire(*any);
   sounds.fire(*any);
   EXPECT_TRUE(calls().empty());
-  EXPECT_FALSE(TarnReportingSnareProcessState::shared()->systemSoundRateLimit().lastFire);
+  TarnReportingSnareProcessState::RateLimit& limit = TarnReportingSnareProcessState::shared()->systemSoundRateLimit();
+  const MutexLock lock(limit.lock);
+  EXPECT_FALSE(limit.lastFire);
 }
 
 }  // namespace

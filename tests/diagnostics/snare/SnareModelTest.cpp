@@ -50,11 +50,15 @@ class Model {
   void message(ModelSession& session, const Drawn& drawn, double now) {
     if (!session.runs) return;
     if (drawn.fault == 0 && counts(haptics, drawn, 2)) {
-      if (fires(haptics, session)) ask(haptics, "requestSnapshot", "haptics", drawn, 0);
+      if (fires(haptics, session)) {
+        ask(haptics, "requestSnapshot", "haptics", drawn, 0);
+      }
     }
     if (drawn.fault == 2 && !session.single && (session.serviceType == 4 || session.serviceType == 11) &&
         counts(session.alarm, drawn, 3) && session.alarm.fired == 0) {
-      if (fires(session.alarm, session)) ask(session.alarm, "startSession", "alarms", drawn, 60);
+      if (fires(session.alarm, session)) {
+        ask(session.alarm, "startSession", "alarms", drawn, 60);
+      }
     }
     if (drawn.fault == 1 && counts(sounds, drawn, 1)) {
       const bool fire = fires(sounds, session);
@@ -92,7 +96,9 @@ class Model {
     static const std::map<int, std::string> kCategories{{4, "Playback"}, {5, "Output"}, {11, "Error"}};
     lines.push_back(std::to_string(state.reporter) + " " + what + " " + type + " " + kCategories.at(drawn.category) +
                     " " + std::to_string(seconds));
-    if (accepts) state.capture = refusal < 0 ? "capture-" + std::to_string(++captures_) : "NONE_RETURNED";
+    if (accepts) {
+      state.capture = refusal < 0 ? "capture-" + std::to_string(++captures_) : "NONE_RETURNED";
+    }
   }
 
   std::size_t reporters_ = 0;
@@ -126,7 +132,9 @@ class SnareModel : public SnareFixture {
   Drawn draw() {
     static constexpr int kCategories[]{4, 5, 11};
     Drawn drawn{below(6), below(3), below(2), kCategories[below(3)]};
-    if (drawn.fault == 2 || drawn.fault == 3) drawn.category = 11;
+    if (drawn.fault == 2 || drawn.fault == 3) {
+      drawn.category = 11;
+    }
     return drawn;
   }
   Message made(const Drawn& drawn) const {
@@ -175,8 +183,12 @@ void SnareModel::asksForWhatTheModelAsksFor() {
       pair.real->setServiceType(static_cast<AudioServiceType>(type));
       world.pairs.push_back(std::move(pair));
     }
-    if (chance(10)) moveTheClock();
-    if (chance(1)) platform_.snare.setAccepts(world.model.accepts = chance(80));
+    if (chance(10)) {
+      moveTheClock();
+    }
+    if (chance(1)) {
+      platform_.snare.setAccepts(world.model.accepts = chance(80));
+    }
     if (chance(1)) {
       world.model.refusal = chance(30) ? below(10) : -1;
       platform_.snare.refuseWith(world.model.refusal < 0 ? std::nullopt
@@ -195,7 +207,9 @@ void SnareModel::asksForWhatTheModelAsksFor() {
         world.model.stop(pair.model);
         break;
       case 3:
-        if (chance(20)) world.pairs.erase(world.pairs.begin() + static_cast<std::ptrdiff_t>(place));
+        if (chance(20)) {
+          world.pairs.erase(world.pairs.begin() + static_cast<std::ptrdiff_t>(place));
+        }
         break;
       default: {
         const Drawn drawn = draw();
@@ -205,7 +219,9 @@ void SnareModel::asksForWhatTheModelAsksFor() {
     }
   }
   std::vector<std::string> real;
-  for (const auto& call : calls()) real.push_back(lineOf(call));
+  for (const auto& call : calls()) {
+    real.push_back(lineOf(call));
+  }
   EXPECT_GT(real.size(), 1000U);
   ASSERT_EQ(real, world.model.lines);
   const Session session = startedSession(AudioServiceType::Generic);
@@ -276,14 +292,18 @@ void SnareModel::firesByTheRuleWhateverTheThresholds() {
   for (int round = 0; round < 300; ++round) {
     static constexpr double kSeconds[]{0, 1, 10, 60, -1};
     ruleOfNext() = {static_cast<std::uint64_t>(below(5)), kSeconds[below(5)], chance(25)};
-    if (chance(5)) ruleOfNext().thresholdCount = 18446744073709551615U;
+    if (chance(5)) {
+      ruleOfNext().thresholdCount = 18446744073709551615U;
+    }
     firedOf().clear();
     Worker worker(session);
     worker.addInstance(Worker::InstanceClass::of<RuledInstance>());
     RuleModel model(ruleOfNext());
     std::vector<int> expected;
     for (int step = 0; step < 200; ++step) {
-      if (chance(50)) moveTheClock();
+      if (chance(50)) {
+        moveTheClock();
+      }
       const int wanted = below(3);
       const double stamp = now();
       if (chance(30)) {
@@ -293,7 +313,9 @@ void SnareModel::firesByTheRuleWhateverTheThresholds() {
       // A repeat must be equal as a whole, so "step" is left out of the payload that is compared by most of them.
       const int number = chance(70) ? -1 : step;
       const int identity = number < 0 ? wanted : 1000 + step;
-      if (model.fires(identity, stamp)) expected.push_back(number);
+      if (model.fires(identity, stamp)) {
+        expected.push_back(number);
+      }
       worker.handleMessage(message({{"wanted", wanted}, {"step", number}}));
     }
     ASSERT_EQ(firedOf(), expected) << "threshold " << ruleOfNext().thresholdCount << ", "

@@ -49,18 +49,14 @@ class AlsaFlumeTest : public ::testing::Test {
   const FlumeChannel& channel(const std::string& what, const std::string& pcm = "pcm0p") const {
     static const FlumeChannel kNone;
     for (const FlumeChannel& each : samples_) {
-      if (each.name.subGroup == pcm && each.name.name->ends_with(what)) {
-        return each;
-      }
+      if (each.name.subGroup == pcm && each.name.name->ends_with(what)) return each;
     }
     ADD_FAILURE() << "no channel " << pcm << " " << what;
     return kNone;
   }
   platform::FlumeState state(const std::string& name) const {
     for (const auto& each : channel(" State").states) {
-      if (each.name == name) {
-        return each;
-      }
+      if (each.name == name) return each;
     }
     ADD_FAILURE() << "no state " << name;
     return {};

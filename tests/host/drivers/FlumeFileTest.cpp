@@ -10,15 +10,16 @@ namespace {
 
 using platform::FlumeChannel;
 using platform::FlumeFormat;
+using platform::FlumeSamples;
 
 // A file of one channel with these members.
-FlumeFileReading readChannel(const std::string& members) {
+Result<FlumeSamples> readChannel(const std::string& members) {
   return parseFlumeFile(R"({"driver": "d", "channels": [{)" + members + "}]}");
 }
 std::string complaintOf(const std::string& text) {
-  const FlumeFileReading reading = parseFlumeFile(text);
-  EXPECT_TRUE(reading.channels.empty()) << text;
-  return reading.complaint;
+  const Result<FlumeSamples> reading = parseFlumeFile(text);
+  EXPECT_TRUE(reading.value.empty()) << text;
+  return reading.error.text();
 }
 std::string complaintOfChannel(const std::string& members) {
   return complaintOf(R"({"driver": "d", "channels": [{)" + members + "}]}");
@@ -28,7 +29,7 @@ std::string complaintOfChannel(const std::string& members) {
 const char* const kOddValues[] = {"true", "\"7\"", "[]", "{}", "{\"$date\": 7}", "{\"$data\": \"AAAA\"}", "7.5"};
 
 TEST(FlumeFile, ReadsChannelsOfEveryFormat) {
-  const FlumeFileReading reading = parseFlumeFile(
+  const Result<FlumeSamples> reading = parseFlumeFile(
       R"({"driver": "OxbowFoo<0x12>", "group": "Haptics", "subgroup": "Stats", "version": 3, "channels": [
         {"name": "Engine On", "format": "simple", "unit": "times", "value": 12, "more": [1]},
         {"name": "Latency", "format": "histogram", "unit": "us", "min": -1, "max": 90,
@@ -37,18 +38,18 @@ TEST(FlumeFile, ReadsChannelsOfEveryFormat) {
           {"name": "on", "transitions": 3, "residency": 1500, "duty_cycle": 0.25},
           {"name": "off", "transitions": 0, "residency": 18446744073709551615, "duty_cycle": 1}]},
         {"name": "Rates", "format": "simplearray", "value": [1, 2]}]})");
-  EXPECT_EQ(reading.complaint, "");
-  ASSERT_EQ(reading.channels.size(), 4U);
-  for (const FlumeChannel& channel : reading.channels) {
+  EXPECT_EQ(reading.error.text(), "");
+  ASSERT_EQ(reading.value.size(), 4U);
+  for (const FlumeChannel& channel : reading.value) {
     EXPECT_EQ(channel.name.driver, "OxbowFoo<0x12>");
     EXPECT_EQ(channel.name.group, "Haptics");
     EXPECT_EQ(channel.name.subGroup, "Stats");
   }
-  EXPECT_EQ(reading.channels[0].name.name, "Engine On");
-  EXPECT_EQ(reading.channels[0].format, FlumeFormat::Simple);
-  EXPECT_EQ(reading.channels[0].unit, "times");
-  EXPECT_EQ(reading.channels[0].value, 12);
-  const FlumeChannel& histogram = reading.channels[1];
+  EXPECT_EQ(reading.value[0].name.name, "Engine On");
+  EXPECT_EQ(reading.value[0].format, FlumeFormat::Simple);
+  EXPECT_EQ(reading.value[0].unit, "times");
+  EXPECT_EQ(reading.value[0].value, 12);
+  const FlumeChannel& histogram = reading.value[1];
   EXPECT_EQ(histogram.format, FlumeFormat::Histogram);
   EXPECT_EQ(histogram.minimum, -1);
   EXPECT_EQ(histogram.maximum, 90);
@@ -57,7 +58,7 @@ TEST(FlumeFile, ReadsChannelsOfEveryFormat) {
   EXPECT_EQ(histogram.buckets[0].upper, 50);
   EXPECT_EQ(histogram.buckets[0].hits, 3);
   EXPECT_EQ(histogram.buckets[1].boundsError, 0);
-  const FlumeChannel& state = reading.channels[2];
+  const FlumeChannel& state = reading.value[2];
   EXPECT_EQ(state.format, FlumeFormat::State);
   ASSERT_EQ(state.states.size(), 2U);
   EXPECT_EQ(state.states[0].name, "on");
@@ -66,22 +67,22 @@ TEST(FlumeFile, ReadsChannelsOfEveryFormat) {
   EXPECT_EQ(state.states[0].dutyCycle, 0.25);
   EXPECT_EQ(state.states[1].residency, std::numeric_limits<std::uint64_t>::max());
   EXPECT_EQ(state.states[1].dutyCycle, 1);
-  EXPECT_EQ(reading.channels[3].format, FlumeFormat::SimpleArray);
-  EXPECT_FALSE(reading.channels[3].unit);
+  EXPECT_EQ(reading.value[3].format, FlumeFormat::SimpleArray);
+  EXPECT_FALSE(reading.value[3].unit);
 }
 
 TEST(FlumeFile, GroupSubgroupAndUnitMayBeMissing) {
-  const FlumeFileReading reading = readChannel(R"("name": "", "format": "simple", "value": -5)");
-  ASSERT_EQ(reading.channels.size(), 1U);
-  EXPECT_FALSE(reading.channels[0].name.group);
-  EXPECT_FALSE(reading.channels[0].name.subGroup);
-  EXPECT_EQ(reading.channels[0].name.name, "");
-  EXPECT_EQ(reading.channels[0].value, -5);
+  const Result<FlumeSamples> reading = readChannel(R"("name": "", "format": "simple", "value": -5)");
+  ASSERT_EQ(reading.value.size(), 1U);
+  EXPECT_FALSE(reading.value[0].name.group);
+  EXPECT_FALSE(reading.value[0].name.subGroup);
+  EXPECT_EQ(reading.value[0].name.name, "");
+  EXPECT_EQ(reading.value[0].value, -5);
 }
 
 TEST(FlumeFile, WholeNumbersMayBeWrittenAsDecimals) {
-  EXPECT_EQ(readChannel(R"("name": "a", "format": "simple", "value": 5.0)").channels.at(0).value, 5);
-  EXPECT_EQ(readChannel(R"("name": "a", "format": "simple", "value": -9.223372036854775808e18)").channels.at(0).value,
+  EXPECT_EQ(readChannel(R"("name": "a", "format": "simple", "value": 5.0)").value.at(0).value, 5);
+  EXPECT_EQ(readChannel(R"("name": "a", "format": "simple", "value": -9.223372036854775808e18)").value.at(0).value,
             std::numeric_limits<std::int64_t>::min());
   EXPECT_EQ(complaintOfChannel(R"("name": "a", "format": "simple", "value": 9.223372036854775808e18)"),
             "channel 1 \"a\": \"value\" must be a whole number");
@@ -107,7 +108,7 @@ TEST(FlumeFile, FileOfAnotherFormHoldsNoChannel) {
 
 TEST(FlumeFile, HalfWrittenFileHoldsNoChannelAtAnyLength) {
   const std::string whole = R"({"driver": "d", "channels": [{"name": "a", "format": "simple", "value": 1}]})";
-  ASSERT_EQ(parseFlumeFile(whole).channels.size(), 1U);
+  ASSERT_EQ(parseFlumeFile(whole).value.size(), 1U);
   for (std::size_t length = 0; length < whole.size(); ++length) {
     EXPECT_NE(complaintOf(whole.substr(0, length)), "") << length;
     EXPECT_NE(complaintOf(whole.substr(0, length) + std::string(whole.size() - length, '\0')), "") << length;
@@ -115,13 +116,13 @@ TEST(FlumeFile, HalfWrittenFileHoldsNoChannelAtAnyLength) {
 }
 
 TEST(FlumeFile, WrongChannelIsLeftOutAndTheOthersCount) {
-  const FlumeFileReading reading = parseFlumeFile(R"({"driver": "d", "channels": [
+  const Result<FlumeSamples> reading = parseFlumeFile(R"({"driver": "d", "channels": [
     {"name": "a", "format": "simple", "value": 1}, {"name": "b\n", "format": "simple"}, 7,
     {"name": "c", "format": "simple", "value": 2}, {"name": "a", "format": "state", "states": []}]})");
-  ASSERT_EQ(reading.channels.size(), 2U);
-  EXPECT_EQ(reading.channels[0].value, 1);
-  EXPECT_EQ(reading.channels[1].value, 2);
-  EXPECT_EQ(reading.complaint, R"(channel 2 "b\n": "value" must be a whole number (2 more))");
+  ASSERT_EQ(reading.value.size(), 2U);
+  EXPECT_EQ(reading.value[0].value, 1);
+  EXPECT_EQ(reading.value[1].value, 2);
+  EXPECT_EQ(reading.error.text(), R"(channel 2 "b\n": "value" must be a whole number (2 more))");
 }
 
 TEST(FlumeFile, EachMemberOfAnotherKindMakesTheChannelWrong) {
@@ -157,9 +158,10 @@ TEST(FlumeFile, EachMemberOfAnotherKindMakesTheChannelWrong) {
                     : each == "name" ? "\"n\""
                                      : "1");
       }
-      const FlumeFileReading reading = readChannel(R"("name": "a", "format": "state", "states": [{)" + members + "}]");
-      EXPECT_EQ(reading.channels.size(), fits ? 1U : 0U) << key;
-      EXPECT_EQ(reading.complaint.empty(), fits) << key;
+      const Result<FlumeSamples> reading =
+          readChannel(R"("name": "a", "format": "state", "states": [{)" + members + "}]");
+      EXPECT_EQ(reading.value.size(), fits ? 1U : 0U) << key;
+      EXPECT_EQ(reading.ok(), fits) << key;
     }
   }
 }
@@ -190,33 +192,33 @@ TEST(FlumeFile, WhatIsBeyondTheBoundsIsLeftOut) {
   const std::string a = R"({"name": "a", "format": "simple", "value": 1})";
   const std::string b = R"({"name": "b", "format": "simple", "value": 1})";
   const std::string c = R"({"name": "c", "format": "simple", "value": 1})";
-  EXPECT_EQ(file(a + "," + b).complaint, "");
-  EXPECT_EQ(file(a + "," + b + "," + c).channels.size(), 2U);
-  EXPECT_EQ(file(a + "," + b + "," + c).complaint, "channel 3: a file has at most 2 channels");
+  EXPECT_EQ(file(a + "," + b).error.text(), "");
+  EXPECT_EQ(file(a + "," + b + "," + c).value.size(), 2U);
+  EXPECT_EQ(file(a + "," + b + "," + c).error.text(), "channel 3: a file has at most 2 channels");
   const std::string bucket = "[0, 1, 1]";
   const auto histogram = [&](const std::string& buckets) {
     return file(R"({"name": "a", "format": "histogram", "min": 0, "max": 1, "buckets": [)" + buckets + "]}");
   };
-  EXPECT_EQ(histogram(bucket).channels.size(), 1U);
-  EXPECT_EQ(histogram(bucket + "," + bucket).complaint,
+  EXPECT_EQ(histogram(bucket).value.size(), 1U);
+  EXPECT_EQ(histogram(bucket + "," + bucket).error.text(),
             "channel 1 \"a\": \"buckets\" must be a list of at most 1 buckets");
   const auto states = [&](const std::string& items) {
     return file(R"({"name": "a", "format": "state", "states": [)" + items + "]}");
   };
   const std::string on = R"({"name": "on", "transitions": 1, "residency": 1, "duty_cycle": 1})";
-  EXPECT_EQ(states(on).channels.size(), 1U);
-  EXPECT_EQ(states(on + "," + on).complaint, "channel 1 \"a\": \"states\" must be a list of at most 1 states");
+  EXPECT_EQ(states(on).value.size(), 1U);
+  EXPECT_EQ(states(on + "," + on).error.text(), "channel 1 \"a\": \"states\" must be a list of at most 1 states");
 }
 
 TEST(FlumeFile, NullIsAsGoodAsNoMember) {
-  const FlumeFileReading reading = parseFlumeFile(
+  const Result<FlumeSamples> reading = parseFlumeFile(
       R"({"driver": "d", "group": null, "subgroup": null, "channels": [
           {"name": "a", "format": "simple", "unit": null, "value": 3, "more": null},
           {"name": "b", "format": "simple", "value": null}]})");
-  ASSERT_EQ(reading.channels.size(), 1U);
-  EXPECT_EQ(reading.channels[0].name, (platform::FlumeChannelName{"d", {}, {}, "a"}));
-  EXPECT_FALSE(reading.channels[0].unit);
-  EXPECT_EQ(reading.complaint, "channel 2 \"b\": \"value\" must be a whole number");
+  ASSERT_EQ(reading.value.size(), 1U);
+  EXPECT_EQ(reading.value[0].name, (platform::FlumeChannelName{"d", {}, {}, "a"}));
+  EXPECT_FALSE(reading.value[0].unit);
+  EXPECT_EQ(reading.error.text(), "channel 2 \"b\": \"value\" must be a whole number");
   EXPECT_EQ(complaintOf(R"({"driver": null, "channels": []})"), "\"driver\" must be a text");
 }
 

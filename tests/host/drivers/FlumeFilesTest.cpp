@@ -232,9 +232,9 @@ class FlumeServiceOnFiles : public FlumeFilesTest {
   }
   FlumeSamples delta(const std::shared_ptr<const FlumeSamples>& earlier,
                      const std::shared_ptr<const FlumeSamples>& later) {
-    const auto outcome = service_.createDelta(earlier, later);
-    EXPECT_FALSE(outcome.failed());
-    return *outcome.value;
+    const auto delta = service_.createDelta(earlier, later);
+    EXPECT_FALSE(delta.failed());
+    return *delta.value;
   }
 
   LinuxFlumeService service_{{&files_}};

@@ -37,8 +37,8 @@ constexpr const char* kZones = "/usr/bin/zonetally -l";
 // Runs something else in place of the tools, which are not on this machine, and gives it less time.
 class StandInRunner final : public platform::CommandRunner {
  public:
-  platform::Outcome<std::unique_ptr<platform::RunningCommand>> start(std::string_view commandText,
-                                                                     std::chrono::nanoseconds timeLimit) override {
+  Result<std::unique_ptr<platform::RunningCommand>> start(std::string_view commandText,
+                                                          std::chrono::nanoseconds timeLimit) override {
     ++starts;
     const auto found = standIns.find(commandText);
     return runner_.start(found == standIns.end() ? commandText : found->second, std::min(timeLimit, limit));

@@ -53,15 +53,15 @@ class MainLoopTest : public ::testing::Test {
 };
 
 TEST_F(MainLoopTest, CallsTheHandlerOfAWatchedDescriptor) {
-  ASSERT_EQ(running_.loop.startError(), "");
-  ASSERT_TRUE(running_.loop.watch(ours_.get(), EPOLLIN, counter_));
+  ASSERT_EQ(running_.loop.setUp().text(), "");
+  ASSERT_TRUE(running_.loop.watch(ours_.get(), EPOLLIN, counter_).ok());
   running_.start();
   sendByte();
   EXPECT_TRUE(eventually([&] { return counter_->bytes == 1; }));
 }
 
 TEST_F(MainLoopTest, LetsGoOfAHandlerThatIsUnwatched) {
-  ASSERT_TRUE(running_.loop.watch(ours_.get(), EPOLLIN, counter_));
+  ASSERT_TRUE(running_.loop.watch(ours_.get(), EPOLLIN, counter_).ok());
   running_.start();
   running_.onQueue([&] { running_.loop.unwatch(ours_.get()); });
   EXPECT_EQ(counter_.use_count(), 1);
@@ -70,7 +70,7 @@ TEST_F(MainLoopTest, LetsGoOfAHandlerThatIsUnwatched) {
 TEST_F(MainLoopTest, CanNotWatchWhatIsNoDescriptorOfTheProcess) {
   const int number = theirs_.get();
   theirs_.reset();
-  EXPECT_FALSE(running_.loop.watch(number, EPOLLIN, counter_));
+  EXPECT_TRUE(running_.loop.watch(number, EPOLLIN, counter_).failed());
 }
 
 TEST_F(MainLoopTest, FlushesOnceATurn) {
@@ -92,7 +92,7 @@ TEST_F(MainLoopTest, FlushesWhatIsReadyWhenItIsStopped) {
 }
 
 TEST_F(MainLoopTest, WorkThatNeverEndsDoesNotStarveTheSockets) {
-  ASSERT_TRUE(running_.loop.watch(ours_.get(), EPOLLIN, counter_));
+  ASSERT_TRUE(running_.loop.watch(ours_.get(), EPOLLIN, counter_).ok());
   struct Again {
     ServerQueue* queue;
     void operator()() const { queue->async(Again{queue}); }
@@ -104,7 +104,7 @@ TEST_F(MainLoopTest, WorkThatNeverEndsDoesNotStarveTheSockets) {
 }
 
 TEST_F(MainLoopTest, SocketsThatAreNeverQuietDoNotStarveTheWork) {
-  ASSERT_TRUE(running_.loop.watch(ours_.get(), EPOLLIN, counter_));
+  ASSERT_TRUE(running_.loop.watch(ours_.get(), EPOLLIN, counter_).ok());
   running_.start();
   std::atomic<bool> done{false};
   std::thread sender([&] {
@@ -155,13 +155,11 @@ int signalInChild(int signal) {
     testing::SteadyClock clock;
     MainLoop loop(clock);
     int received = 0;
-    const auto error = SignalSource::start(source, loop, [&](int which) {
+    const Status heard = SignalSource::start(source, loop, [&](int which) {
       received = which;
       loop.stop();
     });
-    if (!error.empty()) {
-      return 100;
-    }
+    if (heard.failed()) return 100;
     loop.queue()->async([signal] { ::kill(::getpid(), signal); });
     loop.run();
     return received;
@@ -182,9 +180,9 @@ TEST(SignalSource, ASignalThatCameBeforeTheLoopRanIsNotLost) {
               ::kill(::getpid(), SIGTERM);
               testing::SteadyClock clock;
               MainLoop loop(clock);
-              const auto error = SignalSource::start(source, loop, [&](int) { loop.stop(); });
+              const Status heard = SignalSource::start(source, loop, [&](int) { loop.stop(); });
               loop.run();
-              return error.empty() ? 0 : 1;
+              return heard.ok() ? 0 : 1;
             }),
             0);
 }
@@ -193,9 +191,7 @@ TEST(SignalSource, ABrokenPipeDoesNotEndTheProcess) {
   EXPECT_EQ(testing::inChild([] {
               const SignalSource source;
               int pipe[2];
-              if (::pipe(pipe) != 0 || ::close(pipe[0]) != 0) {
-                return 1;
-              }
+              if (::pipe(pipe) != 0 || ::close(pipe[0]) != 0) return 1;
               return ::write(pipe[1], "x", 1) == -1 && errno == EPIPE ? 0 : 2;
             }),
             0);

@@ -21,9 +21,7 @@ class WorkLaneTest : public ::testing::Test {
   // So many slices of this cost, each giving way when it is told to.
   void slices(int left, std::size_t cost) {
     done_.push_back("slice");
-    if (left == 1) {
-      return;
-    }
+    if (left == 1) return;
     if (queue_.spend(cost)) {
       queue_.asyncNext([this, left, cost] { slices(left - 1, cost); });
     } else {

@@ -48,8 +48,12 @@ class LifeLine {
  public:
   LifeLine() {
     std::string pattern = std::filesystem::temp_directory_path() / "tarn-command.XXXXXX";
-    if (const char* made = ::mkdtemp(pattern.data())) directory_ = made;
-    if (::mkfifo(path().c_str(), 0600) == 0) pipe_ = ::open(path().c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC);
+    if (const char* made = ::mkdtemp(pattern.data())) {
+      directory_ = made;
+    }
+    if (::mkfifo(path().c_str(), 0600) == 0) {
+      pipe_ = ::open(path().c_str(), O_RDONLY | O_NONBLOCK | O_CLOEXEC);
+    }
   }
   ~LifeLine() {
     ::close(pipe_);

@@ -95,16 +95,16 @@ TEST_F(RecordedFacts, ProcessThatIsGoneOrHiddenHasNoName) {
 
 TEST_F(RecordedFacts, FootprintIsAnonymousPlusSwapped) {
   folder_.write("self/status", "Name:\tx\nVmSwap:\t     100 kB\nRssAnon:\t    2000 kB\nRssFile:\t 9 kB\n");
-  EXPECT_EQ(facts_.physicalFootprint().bytes, 2100U * 1024U);
+  EXPECT_EQ(facts_.physicalFootprint().value, 2100U * 1024U);
 }
 
 TEST_F(RecordedFacts, FootprintThatCannotBeReadTellsWhy) {
-  EXPECT_EQ(facts_.physicalFootprint().error, folder_.path("self/status") + ": No such file or directory");
+  EXPECT_EQ(facts_.physicalFootprint().error.text(), folder_.path("self/status") + ": No such file or directory");
   folder_.write("self/status", "Name:\tx\nVmSwap:\t100 kB\n");
-  EXPECT_EQ(facts_.physicalFootprint().error, folder_.path("self/status") + ": no RssAnon");
+  EXPECT_EQ(facts_.physicalFootprint().error.text(), folder_.path("self/status") + ": no RssAnon");
   folder_.write("self/status", "Name:\tx\nRssAnon:\t100 kB\n");
-  EXPECT_EQ(facts_.physicalFootprint().error, folder_.path("self/status") + ": no VmSwap");
-  EXPECT_FALSE(facts_.physicalFootprint().bytes);
+  EXPECT_EQ(facts_.physicalFootprint().error.text(), folder_.path("self/status") + ": no VmSwap");
+  EXPECT_EQ(facts_.physicalFootprint().value, 0U);
 }
 
 TEST_F(RecordedFacts, MachineWithoutThermalZonesIsNominal) {
@@ -166,14 +166,14 @@ TEST(LinuxProcessFacts, KnowsThisProcess) {
 
 TEST(LinuxProcessFacts, FootprintGrowsWithMemoryThatIsTouched) {
   const LinuxProcessFacts facts;
-  const std::optional<std::uint64_t> before = facts.physicalFootprint().bytes;
+  const Result<std::uint64_t> before = facts.physicalFootprint();
   constexpr std::size_t kBytes = std::size_t{32} << 20U;
   void* memory = ::mmap(nullptr, kBytes, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS | MAP_POPULATE, -1, 0);
   ASSERT_NE(memory, MAP_FAILED);
-  const std::optional<std::uint64_t> after = facts.physicalFootprint().bytes;
+  const Result<std::uint64_t> after = facts.physicalFootprint();
   ::munmap(memory, kBytes);
-  ASSERT_TRUE(before && after);
-  EXPECT_GT(*after, *before + kBytes / 2);
+  ASSERT_TRUE(before.ok() && after.ok());
+  EXPECT_GT(after.value, before.value + kBytes / 2);
 }
 
 TEST(LinuxProcessFacts, LoadAveragesAreTheMachines) {

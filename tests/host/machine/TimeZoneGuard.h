@@ -13,7 +13,9 @@ class TimeZoneGuard {
  public:
   explicit TimeZoneGuard(const char* zone) : TimeZoneGuard() { set(zone); }
   TimeZoneGuard() {
-    if (const char* zone = std::getenv("TZ")) before_ = zone;
+    if (const char* zone = std::getenv("TZ")) {
+      before_ = zone;
+    }
   }
   ~TimeZoneGuard() {
     if (before_) {

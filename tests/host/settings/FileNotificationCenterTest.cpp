@@ -52,7 +52,7 @@ class FileNotifications : public ::testing::Test {
     });
   }
   std::string fault(std::string_view name) const {
-    return NotificationFolder(folder_.path("notifications")).post(name, 1);
+    return NotificationFolder(folder_.path("notifications")).post(name, 1).text();
   }
   // Posts under another name and waits for it: whatever was posted before has then been handed over too.
   void settle() {

@@ -9,15 +9,14 @@ namespace tarn::linux_host {
 namespace {
 
 std::string errorOf(std::string_view text) {
-  const ReadConfiguration read = parseConfiguration(text, "c.toml");
-  EXPECT_NE(read.configuration.has_value(), !read.error.empty());
-  return read.error;
+  const Result<HostConfiguration> read = parseConfiguration(text, "c.toml");
+  return read.error.text();
 }
 
 TEST(HostConfiguration, EmptyFileHasEveryDefault) {
-  const ReadConfiguration read = parseConfiguration("", "c.toml");
-  ASSERT_TRUE(read.configuration) << read.error;
-  const HostConfiguration& host = *read.configuration;
+  const Result<HostConfiguration> read = parseConfiguration("", "c.toml");
+  ASSERT_TRUE(read.ok()) << read.error->text;
+  const HostConfiguration& host = read.value;
   EXPECT_EQ(host.tally.inUse, (std::vector<std::string>{"*"}));
   EXPECT_EQ(host.rtc.backends, (std::vector<std::string>{"recorder"}));
   EXPECT_FALSE(host.rtc.noBackends);
@@ -34,7 +33,7 @@ TEST(HostConfiguration, EmptyFileHasEveryDefault) {
 }
 
 TEST(HostConfiguration, EverySettingIsRead) {
-  const ReadConfiguration read = parseConfiguration(R"(
+  const Result<HostConfiguration> read = parseConfiguration(R"(
 [tally]
 in_use = ["sys.oxbow.*", "other"]
 [rtc]
@@ -55,9 +54,9 @@ max_age_days = 7
 [limits]
 max_frame_bytes = 65536
 )",
-                                                    "c.toml");
-  ASSERT_TRUE(read.configuration) << read.error;
-  const HostConfiguration& host = *read.configuration;
+                                                            "c.toml");
+  ASSERT_TRUE(read.ok()) << read.error->text;
+  const HostConfiguration& host = read.value;
   EXPECT_EQ(host.tally.inUse, (std::vector<std::string>{"sys.oxbow.*", "other"}));
   EXPECT_TRUE(host.rtc.backends.empty());
   EXPECT_TRUE(host.rtc.noBackends);
@@ -104,13 +103,13 @@ TEST(HostConfiguration, WrongTypesAreErrorsWithTheirLine) {
 TEST(HostConfiguration, ARefusalIsTheNameOfAReasonCode) {
   for (std::size_t code = 0; code < platform::kSnareReasonNames.size(); ++code) {
     const std::string name(platform::kSnareReasonNames[code]);
-    const ReadConfiguration read = parseConfiguration("[snare]\nrefuse = \"" + name + "\"\n", "c.toml");
-    ASSERT_TRUE(read.configuration) << read.error;
-    EXPECT_EQ(read.configuration->snare.refuse, static_cast<platform::SnareReason>(code)) << name;
+    const Result<HostConfiguration> read = parseConfiguration("[snare]\nrefuse = \"" + name + "\"\n", "c.toml");
+    ASSERT_TRUE(read.ok()) << read.error->text;
+    EXPECT_EQ(read.value.snare.refuse, static_cast<platform::SnareReason>(code)) << name;
   }
-  const ReadConfiguration none = parseConfiguration("[snare]\nrefuse = \"\"\n", "c.toml");
-  ASSERT_TRUE(none.configuration) << none.error;
-  EXPECT_FALSE(none.configuration->snare.refuse);
+  const Result<HostConfiguration> none = parseConfiguration("[snare]\nrefuse = \"\"\n", "c.toml");
+  ASSERT_TRUE(none.ok()) << none.error->text;
+  EXPECT_FALSE(none.value.snare.refuse);
   for (const char* wrong : {"dailylimitexceeded", "DailyLimitExceeded ", "6", "kAilmentErrorNone"}) {
     EXPECT_EQ(errorOf("\n[snare]\nrefuse = \"" + std::string(wrong) + "\"\n"),
               "c.toml:3: \"snare.refuse\" must be the name of a reason code, or empty");
@@ -147,9 +146,10 @@ TEST(HostConfiguration, SyntaxErrorNamesItsLine) {
 }
 
 TEST(HostConfiguration, LettersOutsideAsciiAreReadInTextsAndRefusedAsKeys) {
-  const ReadConfiguration read = parseConfiguration("[paths]\nflume = \"\"\"\\\n \xd1\x90\xc3\xa9\"\"\"\n", "c.toml");
-  ASSERT_TRUE(read.configuration) << read.error;
-  EXPECT_EQ(read.configuration->paths.flume, "\xd1\x90\xc3\xa9");
+  const Result<HostConfiguration> read =
+      parseConfiguration("[paths]\nflume = \"\"\"\\\n \xd1\x90\xc3\xa9\"\"\"\n", "c.toml");
+  ASSERT_TRUE(read.ok()) << read.error->text;
+  EXPECT_EQ(read.value.paths.flume, "\xd1\x90\xc3\xa9");
   EXPECT_EQ(errorOf("[paths]\n\xd1\x90 = 1\n").substr(0, 10), "c.toml:2: ");
 }
 
@@ -161,10 +161,10 @@ TEST(HostConfiguration, FileIsReadAndOneThatCannotBeIsNamed) {
   const TemporaryFolder folder;
   folder.write("good.toml", "[recorder]\nmax_age_days = 2\n");
   folder.write("bad.toml", "\nx = 1\n");
-  EXPECT_EQ(readConfiguration(folder.path("good.toml")).configuration->recorder.maxAgeDays, 2);
-  EXPECT_EQ(readConfiguration(folder.path("bad.toml")).error, folder.path("bad.toml") + ":2: unknown key \"x\"");
-  EXPECT_EQ(readConfiguration(folder.path("none")).error, folder.path("none") + ": No such file or directory");
-  EXPECT_EQ(readConfiguration(folder.path()).error, folder.path() + ": Is a directory");
+  EXPECT_EQ(readConfiguration(folder.path("good.toml")).value.recorder.maxAgeDays, 2);
+  EXPECT_EQ(readConfiguration(folder.path("bad.toml")).error.text(), folder.path("bad.toml") + ":2: unknown key \"x\"");
+  EXPECT_EQ(readConfiguration(folder.path("none")).error.text(), folder.path("none") + ": No such file or directory");
+  EXPECT_EQ(readConfiguration(folder.path()).error.text(), folder.path() + ": Is a directory");
 }
 
 TEST(JsonDeviceProperties, WithoutAFileTheDeviceHasNeitherProperty) {
@@ -178,7 +178,7 @@ TEST(JsonDeviceProperties, FileTellsWhatTheDeviceIsAndNothingElseIsKnown) {
   const TemporaryFolder folder;
   folder.write("p.json", R"({"InternalBuild": true, "newer": {"any": [1]}, "flag": true})");
   JsonDeviceProperties properties;
-  ASSERT_EQ(properties.load(folder.path("p.json")), "");
+  ASSERT_EQ(properties.load(folder.path("p.json")).text(), "");
   EXPECT_EQ(properties.boolean("InternalBuild"), true);
   EXPECT_EQ(properties.boolean("flag"), true);
   EXPECT_FALSE(properties.boolean("haptics"));
@@ -190,12 +190,12 @@ TEST(JsonDeviceProperties, WrongFilesAreToldWithTheirPlaceAndChangeNothing) {
   const std::string path = folder.path("p.json");
   JsonDeviceProperties properties;
   folder.write("p.json", "{\n\"newer\": 1,\n\"haptics\": 1}");
-  EXPECT_EQ(properties.load(path), path + ":3: \"haptics\" must be true or false");
+  EXPECT_EQ(properties.load(path).text(), path + ":3: \"haptics\" must be true or false");
   folder.write("p.json", "{\n\"haptics\": yes}");
-  EXPECT_EQ(properties.load(path).substr(0, path.size() + 6), path + ":2:12:");
+  EXPECT_EQ(properties.load(path).text().substr(0, path.size() + 6), path + ":2:12:");
   folder.write("p.json", "[]");
-  EXPECT_EQ(properties.load(path), path + ":1:1: device properties are one JSON object");
-  EXPECT_EQ(properties.load(folder.path("none")), folder.path("none") + ": No such file or directory");
+  EXPECT_EQ(properties.load(path).text(), path + ":1:1: device properties are one JSON object");
+  EXPECT_EQ(properties.load(folder.path("none")).text(), folder.path("none") + ": No such file or directory");
   EXPECT_EQ(properties.boolean("haptics"), false);
 }
 

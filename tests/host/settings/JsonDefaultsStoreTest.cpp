@@ -132,13 +132,13 @@ TEST_F(JsonDefaults, EmptyFileIsBroken) {
 
 TEST_F(JsonDefaults, FolderPipeAndOversizeInPlaceOfTheFileAreBroken) {
   std::filesystem::create_directories(file());
-  EXPECT_EQ(store_.suite(kSuite).fault, file() + ": Is a directory");
+  EXPECT_EQ(store_.suite(kSuite).error.text(), file() + ": Is a directory");
   std::filesystem::remove(file());
   ASSERT_EQ(::mkfifo(file().c_str(), 0600), 0);
-  EXPECT_EQ(store_.suite(kSuite).fault, file() + ": No such device");
+  EXPECT_EQ(store_.suite(kSuite).error.text(), file() + ": No such device");
   std::filesystem::remove(file());
   folder_.write(kFile, std::string(JsonDefaultsStore::kMaximumFileBytes + 1, ' '));
-  EXPECT_EQ(store_.suite(kSuite).fault, file() + ": File too large");
+  EXPECT_EQ(store_.suite(kSuite).error.text(), file() + ": File too large");
 }
 
 TEST_F(JsonDefaults, BrokenFileIsReplacedNeitherByAReadNorByAWrite) {
@@ -157,26 +157,27 @@ TEST_F(JsonDefaults, NamesThatAreNoPlainFileNamesHoldNothingAndTakeNothing) {
        {std::string_view(""), std::string_view("."), std::string_view("../up"), std::string_view("a/b"),
         std::string_view("a\0b", 3), std::string_view(tooLong)}) {
     EXPECT_FALSE(store_.value(name, "n").present());
-    EXPECT_EQ(store_.store(name, "n", 1), "\"" + std::string(name) + "\" can't name a suite");
+    EXPECT_EQ(store_.store(name, "n", 1).text(), "\"" + std::string(name) + "\" can't name a suite");
   }
   EXPECT_FALSE(std::filesystem::exists(folder_.path("defaults")));
-  EXPECT_EQ(store_.store(std::string(200, 'x'), "n", 1), "");
+  EXPECT_EQ(store_.store(std::string(200, 'x'), "n", 1).text(), "");
 }
 
 TEST_F(JsonDefaults, ValueWithoutAJsonFormIsRefused) {
-  EXPECT_EQ(store_.store(kSuite, "n", std::numeric_limits<double>::infinity()), "the value of \"n\" has no JSON form");
-  EXPECT_EQ(store_.store(kSuite, "n", plist::Dictionary{{"$date", 5}}), "the value of \"n\" has no JSON form");
+  EXPECT_EQ(store_.store(kSuite, "n", std::numeric_limits<double>::infinity()).text(),
+            "the value of \"n\" has no JSON form");
+  EXPECT_EQ(store_.store(kSuite, "n", plist::Dictionary{{"$date", 5}}).text(), "the value of \"n\" has no JSON form");
   EXPECT_FALSE(std::filesystem::exists(file()));
 }
 
 TEST_F(JsonDefaults, SuiteThatWouldGrowBeyondItsBoundIsRefused) {
   const std::string large(JsonDefaultsStore::kMaximumFileBytes, 'x');
-  EXPECT_EQ(store_.store(kSuite, "n", large), file() + " would be larger than 1048576 bytes");
+  EXPECT_EQ(store_.store(kSuite, "n", large).text(), file() + " would be larger than 1048576 bytes");
 }
 
 TEST_F(JsonDefaults, FolderThatCannotBeMadeIsToldWithItsPath) {
   folder_.write("defaults", "a file");
-  EXPECT_EQ(store_.store(kSuite, "n", 1), folder_.path("defaults") + ": Not a directory");
+  EXPECT_EQ(store_.store(kSuite, "n", 1).text(), folder_.path("defaults") + ": Not a directory");
   EXPECT_FALSE(store_.value(kSuite, "n").present());
 }
 
@@ -185,7 +186,7 @@ TEST_F(JsonDefaults, LockThatIsNeverFreedMakesTheWriteFail) {
   const UniqueDescriptor holder(::open(folder_.path("defaults/.lock").c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0600));
   ASSERT_EQ(::flock(holder.get(), LOCK_EX), 0);
   JsonDefaultsStore hasty(folder_.path("defaults"), log_, std::chrono::milliseconds(20));
-  EXPECT_EQ(hasty.store(kSuite, "n", 1), folder_.path("defaults/.lock") + ": Connection timed out");
+  EXPECT_EQ(hasty.store(kSuite, "n", 1).text(), folder_.path("defaults/.lock") + ": Connection timed out");
 }
 
 TEST_F(JsonDefaults, ReplacedFileKeepsItsMode) {
@@ -218,7 +219,7 @@ TEST_F(JsonDefaults, WritersInSeveralProcessesLoseNoKey) {
   // Readers meanwhile see whole files only.
   bool running = true;
   while (running) {
-    EXPECT_EQ(store_.suite(kSuite).fault, "");
+    EXPECT_EQ(store_.suite(kSuite).error.text(), "");
     running = !children.empty();
     std::erase_if(children, [](pid_t child) {
       int status = 0;
@@ -227,14 +228,14 @@ TEST_F(JsonDefaults, WritersInSeveralProcessesLoseNoKey) {
       return ended;
     });
   }
-  EXPECT_EQ(store_.suite(kSuite).values.size(), static_cast<std::size_t>(kWriters * kKeys));
+  EXPECT_EQ(store_.suite(kSuite).value.size(), static_cast<std::size_t>(kWriters * kKeys));
 }
 
 TEST_F(JsonDefaults, ThreadsMayReadAndWriteAtOnce) {
   std::atomic<bool> done{false};
   std::thread reader([&] {
     while (!done) {
-      EXPECT_EQ(store_.suite(kSuite).fault, "");
+      EXPECT_EQ(store_.suite(kSuite).error.text(), "");
     }
   });
   std::vector<std::thread> writers;
@@ -250,7 +251,7 @@ TEST_F(JsonDefaults, ThreadsMayReadAndWriteAtOnce) {
   }
   done = true;
   reader.join();
-  EXPECT_EQ(store_.suite(kSuite).values.size(), 60U);
+  EXPECT_EQ(store_.suite(kSuite).value.size(), 60U);
 }
 
 TEST_F(JsonDefaults, ManySuitesAreReadThoughFewAreKeptInMemory) {

@@ -6,7 +6,7 @@
 #include <algorithm>
 #include <vector>
 
-#include "host/settings/StateFolder.h"
+#include "host/settings/StateDirectory.h"
 #include "tests/host/TemporaryFolder.h"
 
 namespace tarn::linux_host {
@@ -22,10 +22,10 @@ ServiceCommand parse(std::vector<const char*> arguments, const HostEnvironment& 
 std::string complaintOf(std::vector<const char*> arguments, const HostEnvironment& environment = kUser) {
   const ServiceCommand command = parse(std::move(arguments), environment);
   EXPECT_FALSE(command.options);
-  EXPECT_EQ(command.exitStatus, 64);
+  EXPECT_EQ(command.usage.code(), 64);
   EXPECT_EQ(command.output, "");
-  EXPECT_EQ(std::count(command.complaint.begin(), command.complaint.end(), '\n'), 1);
-  return command.complaint;
+  EXPECT_EQ(command.usage.text().find('\n'), std::string::npos);
+  return command.usage.text();
 }
 
 TEST(ServiceOptions, DefaultsFollowTheUsersFolders) {
@@ -53,7 +53,7 @@ TEST(ServiceOptions, UnsetAndRelativeVariablesDoNotCount) {
   EXPECT_FALSE(command.options->socketPath);
   EXPECT_EQ(command.options->stateDirectory, "/srv/u/.local/state/tarnreporting");
   EXPECT_EQ(complaintOf({}, {false, "", "", ""}),
-            "tarnreportingd: --state-dir: must be given, neither XDG_STATE_HOME nor HOME names a folder\n");
+            "--state-dir: must be given, neither XDG_STATE_HOME nor HOME names a folder");
 }
 
 TEST(ServiceOptions, EveryOptionIsTaken) {
@@ -70,10 +70,9 @@ TEST(ServiceOptions, EveryOptionIsTaken) {
 }
 
 TEST(ServiceOptions, UsageErrorsAreOneLineThatNamesTheOption) {
-  EXPECT_EQ(complaintOf({"--log-level", "loud"}),
-            "tarnreportingd: --log-level: \"loud\" is none of debug, info, default, error\n");
-  EXPECT_EQ(complaintOf({"--socket="}), "tarnreportingd: --socket: 1 required PATH missing\n");
-  EXPECT_EQ(complaintOf({"--state-dir", ""}), "tarnreportingd: --state-dir: must not be empty\n");
+  EXPECT_EQ(complaintOf({"--log-level", "loud"}), "--log-level: \"loud\" is none of debug, info, default, error");
+  EXPECT_EQ(complaintOf({"--socket="}), "--socket: 1 required PATH missing");
+  EXPECT_EQ(complaintOf({"--state-dir", ""}), "--state-dir: must not be empty");
   EXPECT_NE(complaintOf({"--config"}).find("--config"), std::string::npos);
   EXPECT_NE(complaintOf({"--loud"}).find("--loud"), std::string::npos);
   EXPECT_NE(complaintOf({"stray\nline"}).find("stray line"), std::string::npos);
@@ -83,8 +82,7 @@ TEST(ServiceOptions, UsageErrorsAreOneLineThatNamesTheOption) {
 TEST(ServiceOptions, HelpNamesEveryOptionDefaultAndExitStatus) {
   const ServiceCommand command = parse({"--help"});
   EXPECT_FALSE(command.options);
-  EXPECT_EQ(command.exitStatus, 0);
-  EXPECT_EQ(command.complaint, "");
+  EXPECT_TRUE(command.usage.ok());
   for (const char* part :
        {"--socket PATH", "--state-dir DIR", "--config FILE", "--device-properties FILE", "--log-level LEVEL",
         "--log-target stderr|journal|FILE", "--version", "--help", "$XDG_RUNTIME_DIR/tarnreporting.sock",
@@ -98,45 +96,46 @@ TEST(ServiceOptions, HelpNamesEveryOptionDefaultAndExitStatus) {
 TEST(ServiceOptions, VersionIsOneLine) {
   const ServiceCommand command = parse({"--version"});
   EXPECT_FALSE(command.options);
-  EXPECT_EQ(command.exitStatus, 0);
+  EXPECT_TRUE(command.usage.ok());
   EXPECT_EQ(command.output, "tarnreportingd " TARN_VERSION "\n");
 }
 
-TEST(StateFolder, StateDirectoryIsMadeWithItsParents) {
+TEST(StateDirectory, IsMadeWithItsParents) {
   const TemporaryFolder folder;
-  EXPECT_EQ(prepareStateDirectory(folder.path("a/b/tarnreporting")), "");
+  EXPECT_EQ(prepareStateDirectory(folder.path("a/b/tarnreporting")).text(), "");
   struct stat facts {};
   ASSERT_EQ(::stat(folder.path("a/b/tarnreporting").c_str(), &facts), 0);
   EXPECT_EQ(facts.st_mode & 0777U & ~0750U, 0U);
-  EXPECT_EQ(prepareStateDirectory(folder.path("a/b/tarnreporting/")), "");
+  EXPECT_EQ(prepareStateDirectory(folder.path("a/b/tarnreporting/")).text(), "");
 }
 
-TEST(StateFolder, StateDirectoryThatCannotBeMadeIsToldWithItsPathAndReason) {
+TEST(StateDirectory, OneThatCannotBeMadeIsToldWithItsPathAndReason) {
   const TemporaryFolder folder;
   folder.write("file", "");
-  EXPECT_EQ(prepareStateDirectory(folder.path("file")), "state directory " + folder.path("file") + ": Not a directory");
-  EXPECT_EQ(prepareStateDirectory(folder.path("file/below")),
+  EXPECT_EQ(prepareStateDirectory(folder.path("file")).text(),
+            "state directory " + folder.path("file") + ": Not a directory");
+  EXPECT_EQ(prepareStateDirectory(folder.path("file/below")).text(),
             "state directory " + folder.path("file/below") + ": Not a directory");
-  EXPECT_EQ(prepareStateDirectory("/proc/none"), "state directory /proc/none: No such file or directory");
+  EXPECT_EQ(prepareStateDirectory("/proc/none").text(), "state directory /proc/none: No such file or directory");
 }
 
-TEST(StateFolder, StateDirectoryIsHeldByOneServiceAtATime) {
+TEST(StateDirectory, IsHeldByOneServiceAtATime) {
   constexpr std::chrono::milliseconds kPatience{20};
   const TemporaryFolder folder;
   FileLock second;
   {
     FileLock first;
-    EXPECT_EQ(holdStateDirectory(folder.path(), first, kPatience), "");
-    EXPECT_EQ(holdStateDirectory(folder.path(), second, kPatience),
+    EXPECT_EQ(holdStateDirectory(folder.path(), first, kPatience).text(), "");
+    EXPECT_EQ(holdStateDirectory(folder.path(), second, kPatience).text(),
               "another service uses the state directory " + folder.path());
   }
-  EXPECT_EQ(holdStateDirectory(folder.path(), second, kPatience), "");
+  EXPECT_EQ(holdStateDirectory(folder.path(), second, kPatience).text(), "");
 }
 
-TEST(StateFolder, StateDirectoryThatCannotBeHeldIsToldWithItsPathAndReason) {
+TEST(StateDirectory, OneThatCannotBeHeldIsToldWithItsPathAndReason) {
   const TemporaryFolder folder;
   FileLock lock;
-  EXPECT_EQ(holdStateDirectory(folder.path("none"), lock),
+  EXPECT_EQ(holdStateDirectory(folder.path("none"), lock).text(),
             "state directory " + folder.path("none") + ": No such file or directory");
 }
 

@@ -75,9 +75,9 @@ void expectTheDefaults(const Texts& shown) {
     if (name.starts_with("[paths]")) continue;  // they depend on the installation, and are told in words
     const std::string text =
         name.substr(0, name.find(' ')) + "\n" + name.substr(name.find(' ')) + " = " + shown.at(name);
-    const ReadConfiguration read = parseConfiguration(text, "shown");
-    ASSERT_TRUE(read.configuration) << read.error;
-    EXPECT_EQ(*read.configuration, HostConfiguration()) << text;
+    const Result<HostConfiguration> read = parseConfiguration(text, "shown");
+    ASSERT_TRUE(read.ok()) << read.error->text;
+    EXPECT_EQ(read.value, HostConfiguration()) << text;
   }
 }
 

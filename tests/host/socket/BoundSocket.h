@@ -7,14 +7,14 @@
 
 namespace tarn::testing {
 
-inline linux_host::ListenSocket::Result bindTo(const std::string& path,
+inline Result<linux_host::ListenSocket> bindTo(const std::string& path,
                                                mode_t mode = linux_host::ListenSocket::kDefaultMode) {
-  linux_host::ListenSocket::Result result = linux_host::ListenSocket::claim(path);
-  if (result.error.empty()) {
-    result.error = result.socket.listen(mode);
+  Result<linux_host::ListenSocket> result = linux_host::ListenSocket::claim(path);
+  if (result.ok()) {
+    result.error = result.value.listen(mode);
   }
-  if (!result.error.empty()) {
-    result.socket = linux_host::ListenSocket();
+  if (result.failed()) {
+    result.value = linux_host::ListenSocket();
   }
   return result;
 }

@@ -56,26 +56,26 @@ class ListenSocketTest : public ::testing::Test {
 
 TEST_F(ListenSocketTest, ListensAtAFreshPath) {
   const auto result = bindTo(path_);
-  EXPECT_EQ(result.error, "");
+  EXPECT_EQ(result.error.text(), "");
   EXPECT_TRUE(canConnect(path_));
-  EXPECT_EQ(result.socket.name(), path_);
+  EXPECT_EQ(result.value.name(), path_);
 }
 
 TEST_F(ListenSocketTest, ClaimedPathHasNothingToConnectToBeforeItListens) {
   auto claimed = ListenSocket::claim(path_);
-  EXPECT_EQ(claimed.error, "");
-  EXPECT_TRUE(claimed.socket);
+  EXPECT_EQ(claimed.error.text(), "");
+  EXPECT_TRUE(claimed.value);
   EXPECT_FALSE(std::filesystem::exists(path_));
-  EXPECT_EQ(ListenSocket::claim(path_).error, "another service is listening on " + path_);
-  EXPECT_EQ(claimed.socket.listen(), "");
+  EXPECT_EQ(ListenSocket::claim(path_).error.text(), "another service is listening on " + path_);
+  EXPECT_EQ(claimed.value.listen().text(), "");
   EXPECT_TRUE(canConnect(path_));
 }
 
 TEST_F(ListenSocketTest, ClaimedPathThatSomethingElseTookIsToldWhenItListens) {
   auto claimed = ListenSocket::claim(path_);
   std::ofstream(path_) << "something else";
-  EXPECT_EQ(claimed.socket.listen(), "can't listen on " + path_ + ": Address already in use");
-  claimed.socket = ListenSocket();
+  EXPECT_EQ(claimed.value.listen().text(), "can't listen on " + path_ + ": Address already in use");
+  claimed.value = ListenSocket();
   EXPECT_TRUE(std::filesystem::exists(path_));
 }
 
@@ -92,15 +92,15 @@ TEST_F(ListenSocketTest, ReplacesAStaleSocketFile) {
   boundSocket(path_).reset();
   ASSERT_FALSE(canConnect(path_));
   const auto result = bindTo(path_);
-  EXPECT_EQ(result.error, "");
+  EXPECT_EQ(result.error.text(), "");
   EXPECT_TRUE(canConnect(path_));
 }
 
 TEST_F(ListenSocketTest, RefusesThePathOfAnotherServiceOfItsKind) {
   const auto first = bindTo(path_);
   const auto second = bindTo(path_);
-  EXPECT_FALSE(second.socket);
-  EXPECT_EQ(second.error, "another service is listening on " + path_);
+  EXPECT_FALSE(second.value);
+  EXPECT_EQ(second.error.text(), "another service is listening on " + path_);
   EXPECT_TRUE(canConnect(path_));
 }
 
@@ -108,27 +108,27 @@ TEST_F(ListenSocketTest, RefusesASocketThatAnybodyListensOn) {
   const auto live = boundSocket(path_);
   ASSERT_EQ(::listen(live.get(), 5), 0);
   const auto result = bindTo(path_);
-  EXPECT_EQ(result.error, "another service is listening on " + path_);
+  EXPECT_EQ(result.error.text(), "another service is listening on " + path_);
   EXPECT_TRUE(canConnect(path_));
 }
 
 TEST_F(ListenSocketTest, RefusesASocketOfAnotherKindThatIsInUse) {
   const auto live = boundSocket(path_, SOCK_DGRAM);
-  EXPECT_EQ(bindTo(path_).error, "another service is listening on " + path_);
+  EXPECT_EQ(bindTo(path_).error.text(), "another service is listening on " + path_);
   EXPECT_TRUE(std::filesystem::exists(path_));
 }
 
 TEST_F(ListenSocketTest, NeverRemovesAFileThatIsNoSocket) {
   std::ofstream(path_) << "precious";
-  EXPECT_EQ(bindTo(path_).error, path_ + " exists and is not a socket");
+  EXPECT_EQ(bindTo(path_).error.text(), path_ + " exists and is not a socket");
   EXPECT_EQ(std::filesystem::file_size(path_), 8u);
 }
 
 TEST_F(ListenSocketTest, SaysWhichPathItCanNotUse) {
   const std::string missing = folder_.file("no/such/folder/socket");
-  EXPECT_NE(bindTo(missing).error.find(missing), std::string::npos);
-  EXPECT_NE(bindTo(std::string(200, 'x')).error.find("a path of 1 to 107 bytes"), std::string::npos);
-  EXPECT_NE(bindTo("").error, "");
+  EXPECT_NE(bindTo(missing).error.text().find(missing), std::string::npos);
+  EXPECT_NE(bindTo(std::string(200, 'x')).error.text().find("a path of 1 to 107 bytes"), std::string::npos);
+  EXPECT_NE(bindTo("").error.text(), "");
 }
 
 TEST_F(ListenSocketTest, RemovesItsFilesAtTheEnd) {
@@ -148,13 +148,13 @@ TEST_F(ListenSocketTest, LeavesAFileThatIsNoLongerItsOwn) {
 
 TEST_F(ListenSocketTest, ALockFileThatNobodyHoldsIsNoObstacle) {
   std::ofstream(path_ + ".lock") << "";
-  EXPECT_EQ(bindTo(path_).error, "");
+  EXPECT_EQ(bindTo(path_).error.text(), "");
 }
 
 TEST_F(ListenSocketTest, OfManyThatStartAtOnceOneWins) {
   for (int round = 0; round < 30; ++round) {
     boundSocket(path_).reset();
-    std::vector<ListenSocket::Result> results(6);
+    std::vector<Result<ListenSocket>> results(6);
     std::vector<std::thread> threads;
     for (auto& result : results) {
       threads.emplace_back([&result, this] { result = bindTo(path_); });
@@ -163,14 +163,14 @@ TEST_F(ListenSocketTest, OfManyThatStartAtOnceOneWins) {
       thread.join();
     }
     const auto winners = std::count_if(results.begin(), results.end(),
-                                       [](const auto& result) { return static_cast<bool>(result.socket); });
+                                       [](const auto& result) { return static_cast<bool>(result.value); });
     EXPECT_EQ(winners, 1);
     EXPECT_TRUE(canConnect(path_));
   }
 }
 
 // A child process that is started the way a service manager starts it: the first socket is descriptor 3.
-enum Outcome { kTaken = 10, kNone = 11, kRefused = 12 };
+enum ExitStatus { kTaken = 10, kNone = 11, kRefused = 12 };
 
 int takeInChild(int descriptor, const char* count) {
   return testing::inChild([descriptor, count] {
@@ -181,12 +181,12 @@ int takeInChild(int descriptor, const char* count) {
     if (::getenv("LISTEN_FDS") != nullptr) {
       return 1;  // a child of the service would take the socket for its own
     }
-    if (result.socket) {
+    if (result.value) {
       const bool blocks = (::fcntl(3, F_GETFL) & O_NONBLOCK) == 0;
       const bool inherited = (::fcntl(3, F_GETFD) & FD_CLOEXEC) == 0;
       return blocks || inherited ? 2 : static_cast<int>(kTaken);
     }
-    return result.error.empty() ? static_cast<int>(kNone) : static_cast<int>(kRefused);
+    return result.ok() ? static_cast<int>(kNone) : static_cast<int>(kRefused);
   });
 }
 
@@ -207,7 +207,7 @@ TEST_F(ListenSocketTest, TakesNothingWhenNothingWasHandedOver) {
   EXPECT_EQ(testing::inChild([] {
               ::unsetenv("LISTEN_FDS");
               const auto result = ListenSocket::takeHandedOver();
-              return !result.socket && result.error.empty() ? 0 : 1;
+              return !result.value && result.ok() ? 0 : 1;
             }),
             0);
 }
@@ -220,7 +220,8 @@ TEST_F(ListenSocketTest, RefusesMoreThanOneSocket) {
               ::dup2(socket.get(), 4);
               ::setenv("LISTEN_FDS", "2", 1);
               ::setenv("LISTEN_PID", std::to_string(::getpid()).c_str(), 1);
-              return ListenSocket::takeHandedOver().error == "2 sockets were handed over, one is expected" ? 0 : 1;
+              return ListenSocket::takeHandedOver().error.text() == "2 sockets were handed over, one is expected" ? 0
+                                                                                                                  : 1;
             }),
             0);
 }

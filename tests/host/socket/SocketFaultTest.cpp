@@ -27,9 +27,7 @@ class SocketFaultTest : public testing::SocketFixture {
     TestClient client(path_);
     client.send(framed(body));
     const auto reply = client.reply();
-    if (!reply || !reply->error || reply->error->domain != wire::kErrorDomain || !client.status()) {
-      return 0;
-    }
+    if (!reply || !reply->error || reply->error->domain != wire::kErrorDomain || !client.status()) return 0;
     EXPECT_EQ(reply->id, 7u);
     EXPECT_EQ(errorLines(), 0u);
     return reply->error->code;

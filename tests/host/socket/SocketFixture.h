@@ -27,8 +27,8 @@ class SocketFixture : public ::testing::Test {
     host_ = std::make_unique<linux_host::ConnectionHost>(running_.loop, log_, limits);
     host_->gate.setPauseSource([this] { return paused.load(); });
     auto socket = bindTo(path_);
-    ASSERT_EQ(socket.error, "");
-    listener_ = std::make_shared<linux_host::SocketListener>(*host_, std::move(socket.socket));
+    ASSERT_EQ(socket.error.text(), "");
+    listener_ = std::make_shared<linux_host::SocketListener>(*host_, std::move(socket.value));
     listener_->setDelegate(service_);
     listener_->resume();
     running_.start();

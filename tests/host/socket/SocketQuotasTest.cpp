@@ -19,9 +19,7 @@ class SocketQuotasTest : public testing::SocketFixture {
   // The text of the over-quota error that answers this request; the connection goes on afterwards.
   std::string refusalOf(TestClient& client, const wire::Request& request) {
     const auto reply = client.ask(5, request);
-    if (!reply || !reply->error) {
-      return "served";
-    }
+    if (!reply || !reply->error) return "served";
     EXPECT_EQ(reply->error->domain, wire::kErrorDomain);
     EXPECT_EQ(reply->error->code, 4);
     EXPECT_TRUE(client.status());

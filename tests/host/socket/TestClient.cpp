@@ -32,9 +32,7 @@ bool TestClient::connect(const std::string& path) {
 bool TestClient::send(std::string_view bytes) {
   while (!bytes.empty()) {
     const auto sent = ::send(socket_.get(), bytes.data(), bytes.size(), MSG_NOSIGNAL);
-    if (sent <= 0) {
-      return false;
-    }
+    if (sent <= 0) return false;
     bytes.remove_prefix(static_cast<std::size_t>(sent));
   }
   return true;
@@ -47,9 +45,7 @@ bool TestClient::request(std::uint64_t id, const wire::Request& request) {
 bool TestClient::receive(char* at, std::size_t size) {
   while (size != 0) {
     const auto received = ::recv(socket_.get(), at, size, 0);
-    if (received <= 0) {
-      return false;
-    }
+    if (received <= 0) return false;
     at += received;
     size -= static_cast<std::size_t>(received);
   }
@@ -58,18 +54,12 @@ bool TestClient::receive(char* at, std::size_t size) {
 
 std::optional<wire::DecodedReply> TestClient::reply() {
   std::uint32_t length = 0;
-  if (!receive(reinterpret_cast<char*>(&length), sizeof length)) {
-    return std::nullopt;
-  }
+  if (!receive(reinterpret_cast<char*>(&length), sizeof length)) return std::nullopt;
   std::string body(length, '\0');
-  if (!receive(body.data(), body.size())) {
-    return std::nullopt;
-  }
+  if (!receive(body.data(), body.size())) return std::nullopt;
   wire::DecodedReply reply;
   std::string reason;
-  if (!decoder_.decode(std::as_bytes(std::span(body)), reply, reason)) {
-    return std::nullopt;
-  }
+  if (!decoder_.decode(std::as_bytes(std::span(body)), reply, reason)) return std::nullopt;
   return reply;
 }
 

@@ -31,7 +31,7 @@ TEST_F(FileReplacementTest, WhatIsThereStaysUntilTheNewFileIsWhole) {
   replacement.write("new");
   EXPECT_EQ(folder_.read("f"), "old");
 
-  EXPECT_FALSE(replacement.takePlace(folder_.path("f")));
+  EXPECT_TRUE(replacement.takePlace(folder_.path("f")).ok());
 
   EXPECT_EQ(folder_.read("f"), "new");
   EXPECT_FALSE(isThere(".f.tmp"));
@@ -55,12 +55,12 @@ TEST_F(FileReplacementTest, AfterAFailedWriteNothingTakesThePlace) {
   FileReplacement replacement;
   replacement.begin(UniqueDescriptor(::open("/dev/full", O_WRONLY | O_CLOEXEC)), folder_.path(".f.tmp"));
   replacement.write("new");
-  ASSERT_TRUE(replacement.failure());
+  ASSERT_TRUE(replacement.failure().failed());
   EXPECT_EQ(replacement.failure()->code, ENOSPC);
 
   const auto error = replacement.takePlace(folder_.path("f"));
 
-  ASSERT_TRUE(error);
+  ASSERT_TRUE(error.failed());
   EXPECT_EQ(error->code, ENOSPC);
   EXPECT_EQ(folder_.read("f"), "old");
   EXPECT_FALSE(isThere(".f.tmp"));
@@ -70,7 +70,7 @@ TEST_F(FileReplacementTest, ReplacedFileHandsDownItsMode) {
   folder_.write("f", "old");
   ASSERT_EQ(::chmod(folder_.path("f").c_str(), 0604), 0);
 
-  EXPECT_FALSE(replaceFile(folder_.path("f"), folder_.path(".f.tmp"), "new"));
+  EXPECT_TRUE(replaceFile(folder_.path("f"), folder_.path(".f.tmp"), "new").ok());
 
   struct stat facts {};
   ASSERT_EQ(::stat(folder_.path("f").c_str(), &facts), 0);
@@ -79,13 +79,13 @@ TEST_F(FileReplacementTest, ReplacedFileHandsDownItsMode) {
 }
 
 TEST_F(FileReplacementTest, ReplacedFileLeavesNoTemporaryBehindEvenWhenItFails) {
-  EXPECT_FALSE(replaceFile(folder_.path("f"), folder_.path(".f.tmp"), "content"));
+  EXPECT_TRUE(replaceFile(folder_.path("f"), folder_.path(".f.tmp"), "content").ok());
   EXPECT_EQ(folder_.read("f"), "content");
   std::filesystem::create_directory(folder_.path("taken"));
 
   const auto error = replaceFile(folder_.path("taken"), folder_.path(".t.tmp"), "content");
 
-  ASSERT_TRUE(error);
+  ASSERT_TRUE(error.failed());
   EXPECT_EQ(error->code, EISDIR);
   EXPECT_FALSE(isThere(".t.tmp"));
   EXPECT_FALSE(isThere(".f.tmp"));

@@ -69,7 +69,7 @@ TEST_F(LinuxPerfDataWritersTest, WritesValuesAndExtensionsInTheirOrder) {
   writer->newValue("small", PerfDataUnit::Milliseconds, 1e-300);
   writer->endExtension(writer->startExtension("empty"));
 
-  EXPECT_FALSE(writer->close());
+  EXPECT_TRUE(writer->close().ok());
 
   EXPECT_EQ(contentOf(path()), golden("perfdata.pdj"));
   EXPECT_TRUE(json::accept(contentOf(path())));
@@ -79,15 +79,16 @@ TEST_F(LinuxPerfDataWritersTest, WritesValuesAndExtensionsInTheirOrder) {
 TEST_F(LinuxPerfDataWritersTest, AFileWithoutContentIsWhole) {
   const auto opened = writers_.open(path(), "", -1, 0);
   ASSERT_FALSE(opened.failed());
-  EXPECT_FALSE(opened.value->close());
+  EXPECT_TRUE(opened.value->close().ok());
   EXPECT_EQ(contentOf(path()), golden("perfdata_empty.pdj"));
 }
 
 TEST_F(LinuxPerfDataWritersTest, ValuesThatAreNotFiniteAreTexts) {
   const auto writer = open();
-  for (const double value : {std::nan(""), HUGE_VAL, -HUGE_VAL})
+  for (const double value : {std::nan(""), HUGE_VAL, -HUGE_VAL}) {
     writer->newValue("v", PerfDataUnit::Milliseconds, value);
-  ASSERT_FALSE(writer->close());
+  }
+  ASSERT_TRUE(writer->close().ok());
   const json values = json::parse(contentOf(path())).at("values");
   EXPECT_EQ(values.at(0).at("value"), "nan");
   EXPECT_EQ(values.at(1).at("value"), "inf");
@@ -98,7 +99,7 @@ TEST_F(LinuxPerfDataWritersTest, TextsThatAreNotUtf8AreMended) {
   const auto writer = open("\xFF");
   writer->newValue("a\xC3", PerfDataUnit::Milliseconds, 1);
   writer->stringMember(writer->startExtension("\x80"), "m\xFE", "t\xFD");
-  ASSERT_FALSE(writer->close());
+  ASSERT_TRUE(writer->close().ok());
   const json file = json::parse(contentOf(path()));
   EXPECT_EQ(file.at("name"), "\uFFFD");
   EXPECT_EQ(file.at("values").at(0).at("name"), "a\uFFFD");
@@ -112,26 +113,32 @@ TEST_F(LinuxPerfDataWritersTest, AnExtensionThatIsNotOpenTakesNothing) {
   writer->stringMember(first, "late", "x");
   writer->endExtension(first);
   writer->stringMember(0, "none", "x");
-  ASSERT_FALSE(writer->close());
+  ASSERT_TRUE(writer->close().ok());
   EXPECT_EQ(json::parse(contentOf(path())).at("extensions"), json::parse(R"([{"name": "first", "members": {}}])"));
 }
 
 TEST_F(LinuxPerfDataWritersTest, ManyValuesArriveInOrder) {
   constexpr int kCount = 20000;
   const auto writer = open();
-  for (int value = 0; value < kCount; ++value) writer->newValue("v", PerfDataUnit::Milliseconds, value);
-  ASSERT_FALSE(writer->close());
+  for (int value = 0; value < kCount; ++value) {
+    writer->newValue("v", PerfDataUnit::Milliseconds, value);
+  }
+  ASSERT_TRUE(writer->close().ok());
   const json values = json::parse(contentOf(path())).at("values");
   ASSERT_EQ(values.size(), std::size_t{kCount});
-  for (int value = 0; value < kCount; ++value) ASSERT_EQ(values[static_cast<std::size_t>(value)].at("value"), value);
+  for (int value = 0; value < kCount; ++value) {
+    ASSERT_EQ(values[static_cast<std::size_t>(value)].at("value"), value);
+  }
 }
 
 TEST_F(LinuxPerfDataWritersTest, WhatIsThereStaysUntilTheFileIsWhole) {
   std::ofstream(path()) << "before";
   const auto writer = open();
-  for (int value = 0; value < 5000; ++value) writer->newValue("v", PerfDataUnit::Milliseconds, value);
+  for (int value = 0; value < 5000; ++value) {
+    writer->newValue("v", PerfDataUnit::Milliseconds, value);
+  }
   EXPECT_EQ(contentOf(path()), "before");
-  ASSERT_FALSE(writer->close());
+  ASSERT_TRUE(writer->close().ok());
   EXPECT_TRUE(json::accept(contentOf(path())));
 }
 
@@ -143,16 +150,16 @@ TEST_F(LinuxPerfDataWritersTest, AWriterThatIsNotClosedLeavesNothing) {
 TEST_F(LinuxPerfDataWritersTest, TwoWritersOfOneFileDoNotMeet) {
   const auto first = open("first");
   const auto second = open("second");
-  ASSERT_FALSE(first->close());
-  ASSERT_FALSE(second->close());
+  ASSERT_TRUE(first->close().ok());
+  ASSERT_TRUE(second->close().ok());
   EXPECT_EQ(json::parse(contentOf(path())).at("name"), "second");
   EXPECT_EQ(files().size(), 1U);
 }
 
 TEST_F(LinuxPerfDataWritersTest, AClosedWriterIsClosed) {
   const auto writer = open();
-  ASSERT_FALSE(writer->close());
-  EXPECT_EQ(writer->close().value_or(platform::PlatformError{}).code, EBADF);
+  ASSERT_TRUE(writer->close().ok());
+  EXPECT_EQ(writer->close().code(), EBADF);
   EXPECT_TRUE(json::accept(contentOf(path())));
 }
 
@@ -160,7 +167,7 @@ TEST_F(LinuxPerfDataWritersTest, ThePermissionsAreThoseOfTheMask) {
   const mode_t mask = ::umask(027);
   const auto writer = open();
   ::umask(mask);
-  ASSERT_FALSE(writer->close());
+  ASSERT_TRUE(writer->close().ok());
   struct stat status {};
   ASSERT_EQ(::stat(path().c_str(), &status), 0);
   EXPECT_EQ(status.st_mode & 0777U, 0640U);
@@ -174,7 +181,7 @@ TEST_F(LinuxPerfDataWritersTest, AFolderThatIsMissingIsAnErrorAtTheOpen) {
 }
 
 TEST_F(LinuxPerfDataWritersTest, FlagsAreRefused) {
-  EXPECT_EQ(writers_.open(path(), "n", 4, 1).error.value_or(platform::PlatformError{}).code, EINVAL);
+  EXPECT_EQ(writers_.open(path(), "n", 4, 1).error.code(), EINVAL);
   EXPECT_TRUE(files().empty());
 }
 
@@ -182,7 +189,7 @@ TEST_F(LinuxPerfDataWritersTest, AFolderInTheFilesPlaceIsAnErrorAtTheClose) {
   std::filesystem::create_directory(path());
   const auto writer = open();
   const auto error = writer->close();
-  ASSERT_TRUE(error);
+  ASSERT_TRUE(error.failed());
   EXPECT_EQ(error->code, EISDIR);
   EXPECT_EQ(files().size(), 1U);
 }
@@ -195,8 +202,10 @@ int closeWithRoomFor(LinuxPerfDataWriters& writers, const std::string& path, rli
     if (::setrlimit(RLIMIT_FSIZE, &limit) != 0) return 255;
     auto opened = writers.open(path, "n", 4, 0);
     if (opened.failed()) return 254;
-    for (int value = 0; value < values; ++value) opened.value->newValue("v", PerfDataUnit::Milliseconds, value);
-    return static_cast<int>(opened.value->close().value_or(platform::PlatformError{}).code);
+    for (int value = 0; value < values; ++value) {
+      opened.value->newValue("v", PerfDataUnit::Milliseconds, value);
+    }
+    return static_cast<int>(opened.value->close().code());
   });
 }
 

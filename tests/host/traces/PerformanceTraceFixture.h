@@ -30,10 +30,10 @@ namespace tarn::linux_host {
 // Notes the callbacks of a trace down, and may do something in each.
 class TraceDelegate final : public platform::PerformanceTraceDelegate {
  public:
-  void performanceTraceDidStart(const platform::MaybeError& error) override { note("start", error); }
-  void performanceTraceDidStop(const platform::MaybeError& error) override { note("stop", error); }
+  void performanceTraceDidStart(const Status& error) override { note("start", error); }
+  void performanceTraceDidStop(const Status& error) override { note("stop", error); }
   void performanceTraceDidComplete(const std::string& location, const std::string& token,
-                                   const platform::MaybeError& error) override {
+                                   const Status& error) override {
     {
       const std::lock_guard lock(mutex_);
       location_ = location;
@@ -64,14 +64,16 @@ class TraceDelegate final : public platform::PerformanceTraceDelegate {
   }
 
  private:
-  void note(const std::string& name, const platform::MaybeError& error) {
-    const std::string call = error ? name + ": " + error->text : name;
+  void note(const std::string& name, const Status& error) {
+    const std::string call = error.failed() ? name + ": " + error->text : name;
     {
       const std::lock_guard lock(mutex_);
       calls_.push_back(call);
       threads_.push_back(std::this_thread::get_id());
     }
-    if (also) also(call);
+    if (also) {
+      also(call);
+    }
   }
 
   mutable std::mutex mutex_;
@@ -95,7 +97,9 @@ class PerformanceTraceFixture : public ::testing::Test {
         TraceParts{signposts_, fileSystem_, clock_, processFacts_, log_}, limits);
   }
   LinuxPerformanceTraceService& service() {
-    if (service_ == nullptr) make({});
+    if (service_ == nullptr) {
+      make({});
+    }
     return *service_;
   }
   Trace makeTrace(std::int32_t templateNumber = 2) {
@@ -115,7 +119,9 @@ class PerformanceTraceFixture : public ::testing::Test {
   Trace blockedTrace() {
     Trace trace = makeTrace();
     trace.delegate->also = [this](const std::string& call) {
-      if (call == "start") released_.get_future().wait();
+      if (call == "start") {
+        released_.get_future().wait();
+      }
     };
     trace.session->startTrace();
     EXPECT_TRUE(trace.delegate->waitFor("start"));
@@ -150,7 +156,9 @@ class PerformanceTraceFixture : public ::testing::Test {
     std::vector<Json> found;
     const Json trace = Json::parse(text);
     for (const Json& event : trace.at("traceEvents")) {
-      if (event.at("name") == name) found.push_back(event);
+      if (event.at("name") == name) {
+        found.push_back(event);
+      }
     }
     return found;
   }

@@ -14,12 +14,16 @@ namespace {
 
 std::string bigEndian(std::uint64_t value, std::size_t size) {
   std::string bytes(size, '\0');
-  for (std::size_t at = size; at-- > 0; value >>= 8U) bytes[at] = static_cast<char>(value & 0xFFU);
+  for (std::size_t at = size; at-- > 0; value >>= 8U) {
+    bytes[at] = static_cast<char>(value & 0xFFU);
+  }
   return bytes;
 }
 std::string bytes(std::initializer_list<unsigned> values) {
   std::string made;
-  for (const unsigned value : values) made += static_cast<char>(value);
+  for (const unsigned value : values) {
+    made += static_cast<char>(value);
+  }
   return made;
 }
 
@@ -196,7 +200,9 @@ TEST(BinaryPropertyList, ATrailerThatCannotBeIsAFault) {
 TEST(BinaryPropertyList, NestingIsBounded) {
   const auto nested = [](std::size_t levels) {
     File file;
-    for (std::size_t level = 1; level < levels; ++level) file.objects.push_back("\xA1" + bigEndian(level, 1));
+    for (std::size_t level = 1; level < levels; ++level) {
+      file.objects.push_back("\xA1" + bigEndian(level, 1));
+    }
     file.objects.emplace_back("\xA0");
     return file;
   };
@@ -206,7 +212,9 @@ TEST(BinaryPropertyList, NestingIsBounded) {
 
 TEST(BinaryPropertyList, AFewObjectsThatNameEachOtherOftenAreCutOff) {
   File file;
-  for (unsigned level = 1; level <= 40; ++level) file.objects.push_back(bytes({0xA4, level, level, level, level}));
+  for (unsigned level = 1; level <= 40; ++level) {
+    file.objects.push_back(bytes({0xA4, level, level, level, level}));
+  }
   file.objects.emplace_back("\xA0");
   EXPECT_EQ(faultOf(file), "too many values");
 }
@@ -227,7 +235,9 @@ std::string longUtf16(std::uint64_t units) {
 }
 std::string arrayOfItemOne(std::uint64_t count) {
   std::string object = "\xAF\x12" + bigEndian(count, 4);
-  for (std::uint64_t item = 0; item < count; ++item) object += bigEndian(1, 2);
+  for (std::uint64_t item = 0; item < count; ++item) {
+    object += bigEndian(1, 2);
+  }
   return object;
 }
 
@@ -274,7 +284,9 @@ TEST(BinaryPropertyList, ASharedContainerStandsInEveryPlaceAndIsReadOnce) {
 TEST(BinaryPropertyList, ValuesCountAtEachPlaceOfASharedContainer) {
   // 1 + 1023 * (1 + 1024) values are within the bound, one row more is beyond it.
   File file{{arrayOfItemOne(1023), arrayOfItemOne(1024), "\x09"}};
-  for (std::size_t at = 7; at < file.objects[1].size(); at += 2) file.objects[1][at] = 2;
+  for (std::size_t at = 7; at < file.objects[1].size(); at += 2) {
+    file.objects[1][at] = 2;
+  }
   file.referenceBytes = 2;
   EXPECT_EQ(readFile(file).view().array().size(), 1023U);
   file.objects[0] = arrayOfItemOne(1024);
@@ -285,7 +297,9 @@ TEST(BinaryPropertyList, NestingIsBoundedWhereAContainerIsNamedAgain) {
   // Object 1 is 63 levels high, which the root's first item may be; the second item names it a level deeper.
   const std::size_t high = kMaximumPropertyListNesting - 1;
   File file{{bytes({0xA2, 1}) + bigEndian(high + 1, 1)}};
-  for (std::size_t level = 1; level < high; ++level) file.objects.push_back("\xA1" + bigEndian(level + 1, 1));
+  for (std::size_t level = 1; level < high; ++level) {
+    file.objects.push_back("\xA1" + bigEndian(level + 1, 1));
+  }
   file.objects.emplace_back("\xA0");
   file.objects.push_back(bytes({0xA1, 1}));
   EXPECT_EQ(faultOf(file), "nested too deeply");
@@ -297,7 +311,9 @@ TEST(BinaryPropertyList, TextsThatShareTheirUnitsAreTextsOfTheirOwn) {
   // The count of the first object's text is the mark of the second one's: 0x61 units, and 1.
   std::string file = "bplist00";
   file += bytes({0xA2, 1, 2}) + bytes({0x6F, 0x10, 0x61});
-  for (unsigned unit = 0; unit < 0x61; ++unit) file += bytes({0, 'x'});
+  for (unsigned unit = 0; unit < 0x61; ++unit) {
+    file += bytes({0, 'x'});
+  }
   const std::size_t table = file.size();
   file += bytes({8, 11, 13}) + std::string(6, '\0') + bytes({1, 1}) + bigEndian(3, 8) + bigEndian(0, 8);
   file += bigEndian(table, 8);

@@ -28,7 +28,9 @@ class PropertyListSample : public ::testing::TestWithParam<const char*> {
 
 TEST_P(PropertyListSample, EveryKindOfValueReadsAsItWasWritten) {
   std::string everyByte;
-  for (int byte = 0; byte < 256; ++byte) everyByte += static_cast<char>(byte);
+  for (int byte = 0; byte < 256; ++byte) {
+    everyByte += static_cast<char>(byte);
+  }
   const Value value = read("kinds");
   ASSERT_EQ(value.kind(), Kind::Dictionary);
   const Dictionary kinds = value.view().dictionary();
@@ -78,7 +80,7 @@ TEST_P(PropertyListSample, ATextAloneIsAPropertyList) {
 TEST_P(PropertyListSample, CutOffAtAnyByteItIsAFaultWithItsPlace) {
   const std::string whole = bytesOf(std::string("kinds.") + GetParam() + ".plist");
   const bool isXml = GetParam() == std::string("xml");
-  // What stands behind the last mark of XML is a line end.
+  // What stands after the last mark of XML is a line end.
   const std::size_t last = whole.size() - (isXml ? 1 : 0);
   for (std::size_t size = 0; size < last; ++size) {
     const PropertyListReading reading = readPropertyList(whole.substr(0, size));

@@ -21,8 +21,12 @@ std::string faultOf(const std::string& text) {
 }
 std::string nested(std::size_t levels) {
   std::string text;
-  for (std::size_t level = 0; level < levels; ++level) text += "<array>";
-  for (std::size_t level = 0; level < levels; ++level) text += "</array>";
+  for (std::size_t level = 0; level < levels; ++level) {
+    text += "<array>";
+  }
+  for (std::size_t level = 0; level < levels; ++level) {
+    text += "</array>";
+  }
   return text;
 }
 
@@ -168,7 +172,9 @@ TEST(XmlPropertyList, NestingIsBounded) {
 
 TEST(XmlPropertyList, CountAndSizeAreBounded) {
   std::string many = "<array>";
-  for (std::size_t count = 1; count < kMaximumPropertyListValues; ++count) many += "<true/>";
+  for (std::size_t count = 1; count < kMaximumPropertyListValues; ++count) {
+    many += "<true/>";
+  }
   EXPECT_EQ(read(many + "</array>").view().array().size(), kMaximumPropertyListValues - 1);
   EXPECT_EQ(faultOf(many + "<true/></array>"), "line 1: too many values");
   const std::string longest(kMaximumPropertyListBytes - std::string("<string></string>").size(), 'x');

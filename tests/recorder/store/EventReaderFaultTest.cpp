@@ -25,7 +25,9 @@ class EventReaderFaultTest : public RecorderFixture {
   void write(const std::string& bytes) const { std::ofstream(file(), std::ios::binary) << bytes; }
   static std::string bigEndian(std::size_t value, std::size_t size) {
     std::string bytes(size, '\0');
-    for (std::size_t at = size; at-- > 0; value >>= 8U) bytes[at] = static_cast<char>(value & 0xFFU);
+    for (std::size_t at = size; at-- > 0; value >>= 8U) {
+      bytes[at] = static_cast<char>(value & 0xFFU);
+    }
     return bytes;
   }
   // An interior page of a table whose children are all the same page.
@@ -38,7 +40,9 @@ class EventReaderFaultTest : public RecorderFixture {
       page += bigEndian(kPageBytes - (kCells - cell) * kCellBytes, 2);
     }
     page.resize(kPageBytes - kCells * kCellBytes);
-    for (std::size_t cell = 0; cell < kCells; ++cell) page += bigEndian(child, 4) + bigEndian(cell + 1, 1);
+    for (std::size_t cell = 0; cell < kCells; ++cell) {
+      page += bigEndian(child, 4) + bigEndian(cell + 1, 1);
+    }
     return page;
   }
   // The table of two events behind `levels` levels of pages, each of which names the next one 61 times.

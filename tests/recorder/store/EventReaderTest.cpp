@@ -14,7 +14,9 @@ class EventReaderTest : public RecorderFixture {
  protected:
   static std::vector<std::string> names(const EventReader::Result& result) {
     std::vector<std::string> all;
-    for (const EventRow& row : result.rows) all.push_back(row.name);
+    for (const EventRow& row : result.rows) {
+      all.push_back(row.name);
+    }
     return all;
   }
   void recordAs(std::string_view backend, const std::string& name) {
@@ -161,7 +163,9 @@ TEST_F(EventReaderTest, FollowsIntoAFileWhoseIdsBeginAnew) {
   query.after = reader.read(query).lookedUpTo;
   ASSERT_EQ(query.after, 5);
   stop();
-  for (const char* const suffix : {"", "-wal", "-shm"}) std::filesystem::remove(file().string() + suffix);
+  for (const char* const suffix : {"", "-wal", "-shm"}) {
+    std::filesystem::remove(file().string() + suffix);
+  }
   EXPECT_EQ(reader.read(query).status, Status::Missing);
   start();
   record("anew");

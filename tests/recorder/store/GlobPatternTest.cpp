@@ -70,7 +70,9 @@ TEST(GlobPattern, OddBytesAreCharactersOfTheirOwn) {
 
 TEST(GlobPattern, ManyStarsAgainstALongNameEndQuickly) {
   std::string pattern;
-  for (int i = 0; i < 50; ++i) pattern += "*a";
+  for (int i = 0; i < 50; ++i) {
+    pattern += "*a";
+  }
   EXPECT_FALSE(globMatches(pattern + "b", std::string(20'000, 'a')));
 }
 

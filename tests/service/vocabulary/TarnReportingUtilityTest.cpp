@@ -14,7 +14,7 @@
 namespace tarn {
 namespace {
 
-using testing::WaitOutcome;
+using testing::WaitEnd;
 
 class TarnReportingUtilityTest : public ::testing::Test {
  protected:
@@ -51,7 +51,7 @@ TEST_F(TarnReportingUtilityTest, WaitWithTimeoutZeroLogsTheTimeoutTextAndReturns
 TEST_F(TarnReportingUtilityTest, WaitReturnsTrueOnceTheBackEndSignals) {
   platform_.conditions.onWait([this](auto) {
     TarnReportingUtilitySignal(*condition_, flag_);
-    return WaitOutcome::TimesOut;
+    return WaitEnd::TimesOut;
   });
   EXPECT_TRUE(wait(5));
   EXPECT_EQ(platform_.log.messages(), (std::vector<std::string>{"waiting for the answer", "continuing"}));
@@ -61,7 +61,7 @@ TEST_F(TarnReportingUtilityTest, WaitReturnsTrueOnceTheBackEndSignals) {
 TEST_F(TarnReportingUtilityTest, WaitThatTimedOutIsFalseEvenWhenTheFlagWasSetMeanwhile) {
   platform_.conditions.onWait([this](auto) {
     flag_ = true;  // and nobody signalled
-    return WaitOutcome::TimesOut;
+    return WaitEnd::TimesOut;
   });
   EXPECT_FALSE(wait(5));
   EXPECT_EQ(platform_.log.messages(), (std::vector<std::string>{"waiting for the answer", "no answer came"}));
@@ -69,7 +69,7 @@ TEST_F(TarnReportingUtilityTest, WaitThatTimedOutIsFalseEvenWhenTheFlagWasSetMea
 
 TEST_F(TarnReportingUtilityTest, WakeUpWithoutTheFlagWaitsTheWholeTimeAnew) {
   int waits = 0;
-  platform_.conditions.onWait([&](auto) { return ++waits < 3 ? WaitOutcome::Wakes : WaitOutcome::TimesOut; });
+  platform_.conditions.onWait([&](auto) { return ++waits < 3 ? WaitEnd::Wakes : WaitEnd::TimesOut; });
   EXPECT_FALSE(wait(2.5));
   const std::vector<std::chrono::duration<double>> whole(3, std::chrono::duration<double>(2.5));
   EXPECT_EQ(platform_.conditions.timeouts(), whole);
@@ -98,7 +98,7 @@ TEST_F(TarnReportingUtilityTest, SilentWaitReturnsTheFlagAndLogsNothing) {
 TEST_F(TarnReportingUtilityTest, SilentWaitIsNotProlongedByAWakeUpWithoutTheFlag) {
   platform_.conditions.onWait([this](auto) {
     platform_.clock.advance(std::chrono::seconds(1));
-    return WaitOutcome::Wakes;
+    return WaitEnd::Wakes;
   });
   EXPECT_FALSE(TarnReportingUtilityWait(*condition_, std::chrono::seconds(2), flag_));
   EXPECT_EQ(platform_.conditions.timeouts(),
@@ -108,7 +108,7 @@ TEST_F(TarnReportingUtilityTest, SilentWaitIsNotProlongedByAWakeUpWithoutTheFlag
 TEST_F(TarnReportingUtilityTest, SilentWaitCountsAFlagThatIsSetWhileTheTimeRunsOut) {
   platform_.conditions.onWait([this](auto) {
     flag_ = true;  // and nobody signalled
-    return WaitOutcome::TimesOut;
+    return WaitEnd::TimesOut;
   });
   EXPECT_TRUE(TarnReportingUtilityWait(*condition_, std::chrono::seconds(2), flag_));
 }
@@ -128,7 +128,7 @@ TEST_F(TarnReportingUtilityTest, SignalFromAnotherThreadIsSeenByTheWaiter) {
   platform_.conditions.onWait([this](auto) {
     std::thread backEnd([this] { TarnReportingUtilitySignal(*condition_, flag_); });
     backEnd.join();
-    return WaitOutcome::TimesOut;
+    return WaitEnd::TimesOut;
   });
   EXPECT_TRUE(wait(5));
 }

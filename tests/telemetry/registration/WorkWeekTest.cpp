@@ -36,9 +36,7 @@ int countedWeek(const std::tm& day) {
 bool sharesAWeekWithNewYear(std::time_t seconds, const std::tm& day) {
   for (int i = 1; i <= 6 - day.tm_wday; ++i) {
     // At noon, so that no change of summer time moves the date.
-    if (localTime(seconds + i * kDaySeconds).tm_year != day.tm_year) {
-      return true;
-    }
+    if (localTime(seconds + i * kDaySeconds).tm_year != day.tm_year) return true;
   }
   return false;
 }
@@ -74,7 +72,7 @@ TEST(WorkWeek, FirstOfJanuaryIsInWeekOneWhateverItsDay) {
 }
 
 TEST(WorkWeek, LastDaysOfDecemberBelongToTheNextYearsFirstWeek) {
-  platform::LocalTime sunday;  // 2023-12-31, a Sunday; the Monday behind it is the first of January
+  platform::LocalTime sunday;  // 2023-12-31, a Sunday; the Monday after it is the first of January
   sunday.year = 2023;
   sunday.month = 12;
   sunday.day = 31;

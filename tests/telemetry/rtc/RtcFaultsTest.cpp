@@ -267,7 +267,7 @@ TEST_F(RtcFaults, StopRightBehindAStartStillMirrorsTheSession) {
   EXPECT_TRUE(made.released);
 }
 
-// A start that is still to come would complete behind the stop, and keep the worker out of the next period.
+// A start that is still to come would complete after the stop, and keep the worker out of the next period.
 TEST_F(RtcFaults, StopHelpsAStartThatNoThreadHasComeTo) {
   platform_.workQueues.setHelps(true);
   const auto session = makeTyped(AudioServiceType::Haptics);

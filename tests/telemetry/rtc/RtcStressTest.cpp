@@ -133,7 +133,7 @@ TEST_F(RtcStress, SessionsThatWaitHoldNoThread) {
 }
 
 // Sessions that come, are stopped and go at any time, with completions from threads of their own: none, one or two,
-// before or behind the stop.
+// before or after the stop.
 TEST_F(RtcStress, CompletionsComeFromAnyThreadAtAnyTime) {
   for (const std::uint64_t seed : testSeeds(1)) {
     SCOPED_TRACE(seedNote(seed));

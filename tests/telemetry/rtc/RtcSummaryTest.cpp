@@ -274,9 +274,7 @@ TEST_F(RtcSummary, IsWhatAnObviousModelSaysOfRandomMessages) {
         each->setIsRedundant(below(4) == 0);
         each->setIsSessionStarted(below(4) != 0);
         messages.push_back(each);
-        if (each->isRedundant() || !each->isSessionStarted()) {
-          continue;
-        }
+        if (each->isRedundant() || !each->isSessionStarted()) continue;
         for (const char* name : names) {
           if (payload.contains(name)) {
             lists[name].push_back(payload[name].asText());

@@ -68,7 +68,9 @@ class TraceFixture : public SessionFixture {
   Strings errors() const { return lines(platform::LogLevel::Error); }
   std::vector<double> waits() const {
     std::vector<double> seconds;
-    for (const auto& timeout : platform_.conditions.timeouts()) seconds.push_back(timeout.count());
+    for (const auto& timeout : platform_.conditions.timeouts()) {
+      seconds.push_back(timeout.count());
+    }
     return seconds;
   }
   // The one file that was opened.
@@ -97,7 +99,9 @@ class TraceFixture : public SessionFixture {
     made.name = name;
     made.kind = "SkeinSignpostIntervalProbe";
     made.measuresSignpostIntervals = true;
-    for (const double each : seconds) made.events.push_back(interval("event of " + name, each));
+    for (const double each : seconds) {
+      made.events.push_back(interval("event of " + name, each));
+    }
     made.children = std::move(children);
     return made;
   }

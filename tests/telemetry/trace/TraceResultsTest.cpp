@@ -6,7 +6,6 @@ namespace {
 
 using namespace testing;
 using platform::LogLevel;
-using platform::PlatformError;
 using Operation = FakeFileSystem::Operation;
 
 class TraceResults : public TraceFixture {
@@ -115,7 +114,9 @@ TEST_F(TraceResults, SignpostsComeBeforeProbesAndAllValuesBeforeTheExtensions) {
   analysis().setProbes({probe("p", {0.002})});
   play();
   EXPECT_EQ(file().values, (Values{{"a", 1}, {"a Total", 1}, {"a AVG", 1}, {"p", 2}, {"p Total", 2}, {"p AVG", 2}}));
-  for (const auto& extension : file().extensions) EXPECT_EQ(extension.valuesBefore, 6U);
+  for (const auto& extension : file().extensions) {
+    EXPECT_EQ(extension.valuesBefore, 6U);
+  }
 }
 
 TEST_F(TraceResults, EachMeasurementIsToldBeforeItIsWritten) {
@@ -205,7 +206,9 @@ TEST_F(TraceResults, ChildrenComeBeforeTheirProbeHoweverDeep) {
   play();
   Strings names;
   for (const auto& [name, value] : file().values) {
-    if (name.find(' ') == std::string::npos) names.push_back(name);
+    if (name.find(' ') == std::string::npos) {
+      names.push_back(name);
+    }
   }
   EXPECT_EQ(names, (Strings{"leaf", "a", "b", "root"}));
 }
@@ -236,11 +239,13 @@ TEST_F(TraceResults, ExtensionsAreTheKeyVariablesAndTheDatabase) {
   EXPECT_EQ(file().extensions[1].name, "@tdg-perf.database_id");
   EXPECT_EQ(file().extensions[1].members,
             (std::vector<std::pair<std::string, std::string>>{{"InfluxDB", "TarnReporter"}}));
-  for (const auto& extension : file().extensions) EXPECT_TRUE(extension.ended);
+  for (const auto& extension : file().extensions) {
+    EXPECT_TRUE(extension.ended);
+  }
 }
 
 TEST_F(TraceResults, TraceThatIsNotThereIsLogged) {
-  ASSERT_FALSE(platform_.fileSystem.moveFile(kTrace, "/device/gone"));
+  ASSERT_TRUE(platform_.fileSystem.moveFile(kTrace, "/device/gone").ok());
   play();
   EXPECT_EQ(errors(), Strings{"No traceResults at path: /device/traces/1"});
   expectNoFile();
@@ -321,7 +326,7 @@ TEST_F(TraceResults, DescriptionsThatCannotBeParsedAreLoggedWithTheirPlace) {
 }
 
 TEST_F(TraceResults, DescriptionsThatCannotBeReadAreLogged) {
-  platform_.fileSystem.failNext(Operation::ReadFile, PlatformError{13, "Permission denied"});
+  platform_.fileSystem.failNext(Operation::ReadFile, Error{13, "Permission denied"});
   play();
   EXPECT_EQ(errors(), Strings{"Permission denied failed to get SkeinProbes from /device/probes.plist"});
   expectNoFile();
@@ -340,7 +345,7 @@ TEST_F(TraceResults, LibraryIsToldSoBeforeItIsLoaded) {
 }
 
 TEST_F(TraceResults, EnvironmentThatRefusesIsLoggedAndTheAnalysisTriedAllTheSame) {
-  platform_.processEnvironment.refuse(PlatformError{12, "Cannot allocate memory"});
+  platform_.processEnvironment.refuse(Error{12, "Cannot allocate memory"});
   play();
   EXPECT_EQ(errors(), Strings{"failed to set APPROVED_BY_SKEIN_TEAM: Cannot allocate memory"});
   EXPECT_TRUE(file().closed);
@@ -361,7 +366,7 @@ TEST_F(TraceResults, LibraryIsOnlyLoadedForATraceWithProbes) {
 }
 
 TEST_F(TraceResults, TraceThatCannotBeOpenedIsLogged) {
-  analysis().failOpening(PlatformError{22, "not a trace"});
+  analysis().failOpening(Error{22, "not a trace"});
   play();
   EXPECT_EQ(errors(), Strings{"failed to create Skein model: not a trace"});
   EXPECT_TRUE(platform_.perfDataWriters.files().empty());
@@ -369,7 +374,7 @@ TEST_F(TraceResults, TraceThatCannotBeOpenedIsLogged) {
 
 TEST_F(TraceResults, TraceWithoutReadableIntervalsStillGivesItsProbes) {
   analysis().setIntervals({interval("a", 1)});
-  analysis().failIntervals(PlatformError{22, "cut off"});
+  analysis().failIntervals(Error{22, "cut off"});
   analysis().setProbes({probe("p", {0.001})});
   play();
   EXPECT_EQ(errors(), Strings{"failed to create Skein signpost data model: cut off"});
@@ -377,7 +382,7 @@ TEST_F(TraceResults, TraceWithoutReadableIntervalsStillGivesItsProbes) {
 }
 
 TEST_F(TraceResults, DirectoryThatCannotBeMadeIsLoggedAndTheFileWrittenAllTheSame) {
-  platform_.fileSystem.failNext(Operation::CreateDirectories, PlatformError{30, "Read-only file system"});
+  platform_.fileSystem.failNext(Operation::CreateDirectories, Error{30, "Read-only file system"});
   play();
   EXPECT_EQ(errors(),
             (Strings{std::string("can't create logging directory at ") + kDirectory + ": Read-only file system",
@@ -388,7 +393,7 @@ TEST_F(TraceResults, DirectoryThatCannotBeMadeIsLoggedAndTheFileWrittenAllTheSam
 TEST_F(TraceResults, WriterThatCannotBeOpenedIsLoggedAndNothingWritten) {
   analysis().setIntervals({interval("a", 1)});
   analysis().setProbes({probe("p", {1})});
-  platform_.perfDataWriters.failOpen(PlatformError{13, "Permission denied"});
+  platform_.perfDataWriters.failOpen(Error{13, "Permission denied"});
   const auto session = makeTestSession();
   session->start();
   session->stop();
@@ -398,7 +403,7 @@ TEST_F(TraceResults, WriterThatCannotBeOpenedIsLoggedAndNothingWritten) {
 }
 
 TEST_F(TraceResults, FileThatCannotBeClosedIsNotMoved) {
-  platform_.perfDataWriters.failClose(PlatformError{28, "No space left on device"});
+  platform_.perfDataWriters.failClose(Error{28, "No space left on device"});
   play();
   EXPECT_EQ(errors(), Strings{"Failed to close perfdata writer. errno: 28"});
   EXPECT_FALSE(platform_.log.contains("Moving file"));
@@ -406,7 +411,7 @@ TEST_F(TraceResults, FileThatCannotBeClosedIsNotMoved) {
 }
 
 TEST_F(TraceResults, FileThatCannotBeMovedIsLogged) {
-  platform_.fileSystem.failNext(Operation::MoveFile, PlatformError{18, "Invalid cross-device link"});
+  platform_.fileSystem.failNext(Operation::MoveFile, Error{18, "Invalid cross-device link"});
   play();
   EXPECT_EQ(errors(), Strings{"Failed to move file"});
   EXPECT_TRUE(platform_.log.contains("Moving file from tempWriterPath: /device/tmp/temp_perfdata.pdj to "));
@@ -415,7 +420,9 @@ TEST_F(TraceResults, FileThatCannotBeMovedIsLogged) {
 TEST_F(TraceResults, ManyIntervalsKeepTheirSums) {
   constexpr int kCount = 100'000;
   std::vector<platform::SignpostInterval> intervals;
-  for (int count = 0; count < kCount; ++count) intervals.push_back(interval(count % 2 == 0 ? "even" : "odd", 0.001));
+  for (int count = 0; count < kCount; ++count) {
+    intervals.push_back(interval(count % 2 == 0 ? "even" : "odd", 0.001));
+  }
   analysis().setIntervals(intervals);
   play();
   ASSERT_EQ(file().values.size(), std::size_t{kCount} + 4);

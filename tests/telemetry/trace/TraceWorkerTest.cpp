@@ -12,7 +12,6 @@ namespace {
 using namespace testing;
 using namespace std::chrono_literals;
 using platform::LogLevel;
-using platform::PlatformError;
 
 class TraceWorker : public TraceFixture {
  protected:
@@ -26,7 +25,7 @@ class TraceWorker : public TraceFixture {
     facility().callbacks().set(ReplyFault::Hold);
     platform_.conditions.onWait([this](auto) {
       facility().callbacks().deliverHeld();
-      return WaitOutcome::TimesOut;  // unless that signalled
+      return WaitEnd::TimesOut;  // unless that signalled
     });
   }
 };
@@ -100,7 +99,9 @@ TEST_F(TraceWorker, ProfilesHaveATemplateOfTheirOwnAndEverythingElseTheOtherUnco
       {{{"TarnReportingTraceType", 3}}, 2},
       {{{"TarnReportingTraceType", plist::Array{"sktrace_profile"}}}, 2},
   };
-  for (const auto& [configuration, number] : cases) makeTestSession(configuration)->start();
+  for (const auto& [configuration, number] : cases) {
+    makeTestSession(configuration)->start();
+  }
   ASSERT_EQ(facility().traces().size(), cases.size());
   for (std::size_t at = 0; at < cases.size(); ++at) {
     EXPECT_EQ(facility().traces()[at].configuration.templateNumber, cases[at].second) << at;
@@ -148,7 +149,7 @@ TEST_F(TraceWorker, WakeUpAtTheVeryEndOfTheTimeIsTheEnd) {
   facility().callbacks().set(ReplyFault::Hold);
   platform_.conditions.onWait([this](auto) {
     platform_.clock.advance(5s);
-    return WaitOutcome::Wakes;
+    return WaitEnd::Wakes;
   });
   makeTestSession()->start();
   EXPECT_EQ(waits(), (std::vector<double>{15, 10, 5}));
@@ -159,7 +160,7 @@ TEST_F(TraceWorker, WakeUpANanosecondBeforeTheEndIsNotTheEnd) {
   facility().callbacks().set(ReplyFault::Hold);
   platform_.conditions.onWait([this](auto timeout) {
     platform_.clock.advance(timeout.count() > 1 ? 15s - 1ns : 1ns);
-    return WaitOutcome::Wakes;
+    return WaitEnd::Wakes;
   });
   makeTestSession()->start();
   EXPECT_EQ(waits(), (std::vector<double>{15, 1e-9}));
@@ -197,8 +198,8 @@ TEST_F(TraceWorker, SessionIsLetGoBeforeItsErrorIsTold) {
     return std::make_shared<TarnReportingTraceRecording>(facility().createSession({}),
                                                          platform_.conditions.makeCondition());
   };
-  recording()->performanceTraceDidStart(PlatformError{5, "no buffer"});
-  recording()->performanceTraceDidStop(PlatformError{5, "disk gone"});
+  recording()->performanceTraceDidStart(Error{5, "no buffer"});
+  recording()->performanceTraceDidStop(Error{5, "disk gone"});
   EXPECT_EQ(told, (Strings{"log performanceTraceDidStart no buffer!", "log performanceTraceDidStop disk gone!"}));
 }
 
@@ -235,7 +236,7 @@ TEST_F(TraceWorker, WakeUpWithoutAnAnswerDoesNotProlongTheWait) {
   facility().callbacks().set(ReplyFault::Hold);
   platform_.conditions.onWait([this](auto) {
     platform_.clock.advance(4s);
-    return WaitOutcome::Wakes;
+    return WaitEnd::Wakes;
   });
   const auto session = makeTestSession();
   session->start();
@@ -262,7 +263,7 @@ TEST_F(TraceWorker, StartWithoutAnAnswerStopsTheTraceAndIsNotTriedAgain) {
 }
 
 TEST_F(TraceWorker, TraceThatIsNotValidIsNotStoppedWhenItsStartTimesOut) {
-  facility().failStart(PlatformError{5, "no buffer"});
+  facility().failStart(Error{5, "no buffer"});
   facility().callbacks().set(ReplyFault::Drop);
   makeTestSession()->start();
   EXPECT_EQ(facility().traces().at(0).stops, 0U);
@@ -273,7 +274,7 @@ TEST_F(TraceWorker, AnswerBehindTheTimeOutIsLoggedAndChangesNothing) {
   facility().callbacks().set(ReplyFault::Hold);
   const auto session = makeTestSession();
   session->start();
-  EXPECT_EQ(facility().callbacks().deliverHeld(), 2U);  // of the start, and of the stop behind the time-out
+  EXPECT_EQ(facility().callbacks().deliverHeld(), 2U);  // of the start, and of the stop after the time-out
   EXPECT_FALSE(workerOf(*session).started());
   EXPECT_EQ(lines(LogLevel::Info), (Strings{"Performance Trace Started", "Performance Trace Stopped",
                                             "Performance Trace Completed: /device/traces/1"}));
@@ -282,7 +283,7 @@ TEST_F(TraceWorker, AnswerBehindTheTimeOutIsLoggedAndChangesNothing) {
 }
 
 TEST_F(TraceWorker, StartWithAnErrorIsLoggedAndLeavesNothingToStop) {
-  facility().failStart(PlatformError{5, "no buffer"});
+  facility().failStart(Error{5, "no buffer"});
   const auto session = makeTestSession();
   session->start();
   EXPECT_TRUE(workerOf(*session).started());
@@ -294,7 +295,7 @@ TEST_F(TraceWorker, StartWithAnErrorIsLoggedAndLeavesNothingToStop) {
 }
 
 TEST_F(TraceWorker, SessionIsTracedAgainBehindAStartWithAnError) {
-  facility().failStart(PlatformError{5, "no buffer"});
+  facility().failStart(Error{5, "no buffer"});
   const auto session = makeTestSession();
   session->start();
   session->stop();
@@ -330,7 +331,7 @@ TEST_F(TraceWorker, StopWithoutAnAnswerLeavesNoFile) {
 TEST_F(TraceWorker, StopWithAnErrorDoesNotEndTheWait) {
   const auto session = makeTestSession();
   session->start();
-  facility().failStop(PlatformError{5, "disk gone"});
+  facility().failStop(Error{5, "disk gone"});
   session->stop();
   EXPECT_EQ(errors(), (Strings{"performanceTraceDidStop disk gone", kStopTimedOut}));
   EXPECT_EQ(waits(), std::vector<double>{180});
@@ -338,7 +339,7 @@ TEST_F(TraceWorker, StopWithAnErrorDoesNotEndTheWait) {
 }
 
 TEST_F(TraceWorker, CompletionWithAnErrorLeavesNoTraceToAnalyse) {
-  facility().failCompletion(PlatformError{28, "No space left on device"});
+  facility().failCompletion(Error{28, "No space left on device"});
   play();
   EXPECT_EQ(errors(),
             (Strings{"performanceTraceDidComplete No space left on device", "No traceResults at path: (null)"}));
@@ -349,7 +350,9 @@ TEST_F(TraceWorker, CompletionWithAnErrorLeavesNoTraceToAnalyse) {
 
 TEST_F(TraceWorker, CompletionTakesTheDelegateAway) {
   for (const bool fails : {false, true}) {
-    if (fails) facility().failCompletion(PlatformError{28, "No space left on device"});
+    if (fails) {
+      facility().failCompletion(Error{28, "No space left on device"});
+    }
     const auto session = makeTestSession();
     session->start();
     EXPECT_TRUE(facility().traces().back().hasDelegate);
@@ -396,7 +399,7 @@ TEST_F(TraceWorker, EvaluationIsAnnouncedAsABlockOnPurposeAndTheWaitsAreNotPartO
   platform_.conditions.onWait([&](auto) {
     blockedWhileWaiting = platform_.conditions.isBlockedOnPurpose();
     facility().callbacks().deliverHeld();
-    return WaitOutcome::TimesOut;
+    return WaitEnd::TimesOut;
   });
   bool blockedWhileReading = false;
   platform_.traceAnalysis.onLoad([&] { blockedWhileReading = platform_.conditions.isBlockedOnPurpose(); });
@@ -471,7 +474,7 @@ TEST_F(TraceWorker, AnswersMayComeFromAnotherThread) {
   facility().callbacks().set(ReplyFault::OtherThread);
   platform_.conditions.onWait([this](auto) {
     facility().callbacks().joinThreads();
-    return WaitOutcome::TimesOut;
+    return WaitEnd::TimesOut;
   });
   platform_.traceAnalysis.setIntervals({interval("a", 0.5)});
   play();
@@ -486,19 +489,25 @@ TEST_F(TraceWorker, AnswersFromOtherThreadsRaceWithTimeOutsAndEnds) {
   facility().callbacks().set(ReplyFault::OtherThread);
   int waited = 0;
   platform_.conditions.onWait([&waited](auto) {
-    if (++waited % 3 != 0) std::this_thread::yield();
-    return WaitOutcome::TimesOut;
+    if (++waited % 3 != 0) {
+      std::this_thread::yield();
+    }
+    return WaitEnd::TimesOut;
   });
   for (int count = 0; count < kSessions; ++count) {
     auto session = makeTestSession();
     session->start();
-    if (count % 2 == 0) session->stop();
+    if (count % 2 == 0) {
+      session->stop();
+    }
     session.reset();
   }
   facility().callbacks().joinThreads();
   const auto traces = facility().traces();
   EXPECT_EQ(traces.size(), std::size_t{kSessions});
-  for (const auto& trace : traces) EXPECT_TRUE(trace.released);
+  for (const auto& trace : traces) {
+    EXPECT_TRUE(trace.released);
+  }
 }
 
 }  // namespace

@@ -20,11 +20,11 @@ std::string traceOf(const std::string& events) {
 }
 
 // "subsystem name begin+duration" of each interval, in nanoseconds.
-Strings described(const ReadTrace& read) {
-  EXPECT_EQ(read.failure, "");
+Strings described(const Result<ChromeTrace>& read) {
+  EXPECT_EQ(read.error.text(), "");
   Strings texts;
-  for (const Interval& interval : read.trace.intervals) {
-    texts.push_back(read.trace.texts[interval.subsystem] + " " + read.trace.texts[interval.name] + " " +
+  for (const Interval& interval : read.value.intervals) {
+    texts.push_back(read.value.texts[interval.subsystem] + " " + read.value.texts[interval.name] + " " +
                     std::to_string(interval.begin) + "+" + std::to_string(interval.duration));
   }
   return texts;
@@ -106,19 +106,19 @@ TEST(ChromeTrace, EventsWithAValueOfTheWrongTypeGiveNoInterval) {
 }
 
 TEST(ChromeTrace, BrokenTextsAreFailures) {
-  EXPECT_EQ(parseTrace("").failure.substr(0, 24), "it is no whole JSON text");
-  EXPECT_EQ(parseTrace("{\"traceEvents\":[{}").failure, "it is no whole JSON text: at byte 19");
-  EXPECT_FALSE(parseTrace("{\"traceEvents\":[]} x").failure.empty());
-  EXPECT_FALSE(parseTrace(traceOf("{\"name\":\"\xff\"}")).failure.empty());
-  EXPECT_EQ(parseTrace("{}").failure, "it has no array of trace events");
-  EXPECT_EQ(parseTrace("7").failure, "it has no array of trace events");
-  EXPECT_EQ(parseTrace(R"({"traceEvents":7})").failure, "it has no array of trace events");
+  EXPECT_EQ(parseTrace("").error.text().substr(0, 24), "it is no whole JSON text");
+  EXPECT_EQ(parseTrace("{\"traceEvents\":[{}").error.text(), "it is no whole JSON text: at byte 19");
+  EXPECT_FALSE(parseTrace("{\"traceEvents\":[]} x").ok());
+  EXPECT_FALSE(parseTrace(traceOf("{\"name\":\"\xff\"}")).ok());
+  EXPECT_EQ(parseTrace("{}").error.text(), "it has no array of trace events");
+  EXPECT_EQ(parseTrace("7").error.text(), "it has no array of trace events");
+  EXPECT_EQ(parseTrace(R"({"traceEvents":7})").error.text(), "it has no array of trace events");
 }
 
 TEST(ChromeTrace, EveryPrefixOfATraceIsAFailure) {
   const std::string whole = traceOf(event("B", "a", 1) + "," + event("E", "a", 2));
   for (std::size_t size = 0; size < whole.size(); ++size) {
-    EXPECT_FALSE(parseTrace(std::string_view(whole).substr(0, size)).failure.empty()) << size;
+    EXPECT_FALSE(parseTrace(std::string_view(whole).substr(0, size)).ok()) << size;
   }
 }
 
@@ -127,29 +127,29 @@ TEST(ChromeTrace, BoundsAreFailuresBehindThem) {
   limits.mostEvents = 2;
   limits.mostDepth = 4;
   const std::string two = event("B", "a", 1) + "," + event("E", "a", 2);
-  EXPECT_EQ(parseTrace(traceOf(two), limits).failure, "");
-  EXPECT_EQ(parseTrace(traceOf(two + "," + event("B", "a", 3)), limits).failure, "it has more than 2 events");
-  EXPECT_EQ(parseTrace(traceOf(R"({"args":{}})"), limits).failure, "");
-  EXPECT_EQ(parseTrace(traceOf(R"({"args":{"a":[]}})"), limits).failure, "its values nest too deep");
+  EXPECT_EQ(parseTrace(traceOf(two), limits).error.text(), "");
+  EXPECT_EQ(parseTrace(traceOf(two + "," + event("B", "a", 3)), limits).error.text(), "it has more than 2 events");
+  EXPECT_EQ(parseTrace(traceOf(R"({"args":{}})"), limits).error.text(), "");
+  EXPECT_EQ(parseTrace(traceOf(R"({"args":{"a":[]}})"), limits).error.text(), "its values nest too deep");
   limits.mostBytes = 10;
-  EXPECT_EQ(parseTrace(traceOf(""), limits).code, EFBIG);
+  EXPECT_EQ(parseTrace(traceOf(""), limits).error.code(), EFBIG);
 }
 
 TEST(ChromeTrace, DeepNestingIsAFailureAndNothingWorse) {
   const std::string deep(1'000'000, '[');
-  EXPECT_EQ(parseTrace(deep).failure, "its values nest too deep");
+  EXPECT_EQ(parseTrace(deep).error.text(), "its values nest too deep");
 }
 
 TEST(ChromeTrace, FilesThatCantBeReadAreFailures) {
   const TemporaryFolder folder;
-  EXPECT_EQ(readTrace(folder.path("absent")).code, ENOENT);
-  EXPECT_EQ(readTrace(folder.path()).code, ENODEV);
+  EXPECT_EQ(readTrace(folder.path("absent")).error.code(), ENOENT);
+  EXPECT_EQ(readTrace(folder.path()).error.code(), ENODEV);
   ASSERT_EQ(::mkfifo(folder.path("pipe").c_str(), 0600), 0);
-  EXPECT_EQ(readTrace(folder.path("pipe")).code, ENODEV);
+  EXPECT_EQ(readTrace(folder.path("pipe")).error.code(), ENODEV);
   folder.write("large", std::string(11, ' '));
   TraceLimits limits;
   limits.mostBytes = 10;
-  EXPECT_EQ(readTrace(folder.path("large"), limits).code, EFBIG);
+  EXPECT_EQ(readTrace(folder.path("large"), limits).error.code(), EFBIG);
   folder.write("good", traceOf(R"({"ph":"X","ts":1,"dur":2,"name":"a"})"));
   EXPECT_EQ(described(readTrace(folder.path("good"))), Strings{" a 1000+2000"});
 }
@@ -205,10 +205,10 @@ TEST(ChromeTrace, ManyEndsWithoutTheirBeginsAreQuick) {
   for (int i = 0; i < kEach; ++i) {
     text += R"({"ph":"E","name":"b","ts":2},)";
   }
-  const ReadTrace read = parseTrace(text + R"({"ph":"E","name":"a","ts":3}]})");
-  EXPECT_EQ(read.failure, "");
-  ASSERT_EQ(read.trace.intervals.size(), 1U);
-  EXPECT_EQ(read.trace.intervals[0].duration, 2000);
+  const Result<ChromeTrace> read = parseTrace(text + R"({"ph":"E","name":"a","ts":3}]})");
+  EXPECT_EQ(read.error.text(), "");
+  ASSERT_EQ(read.value.intervals.size(), 1U);
+  EXPECT_EQ(read.value.intervals[0].duration, 2000);
 }
 
 }  // namespace

@@ -132,7 +132,7 @@ TEST_F(TraceAnalysis, AnotherLibraryLacksEveryClass) {
 TEST_F(TraceAnalysis, ATraceOfAnotherLibraryHasNoProbes) {
   class Stranger final : public platform::TraceModel {
    public:
-    platform::Outcome<std::vector<platform::SignpostInterval>> allSignpostIntervals() override { return {}; }
+    Result<std::vector<platform::SignpostInterval>> allSignpostIntervals() override { return {}; }
   } stranger;
   EXPECT_TRUE(library()->probesForDictionaries({plist::Dictionary{{"name", "a"}}}, stranger).empty());
 }

@@ -15,9 +15,9 @@ class ProbeDescriptions : public ::testing::Test {
                            {{0, 10, 1, 0}, {20, 10, 3, 0}, {40, 10, 1, 2}}};
 
   std::vector<Probe> probes(const std::string& descriptions) const {
-    const ReadProbes read = probesFor("[" + descriptions + "]", trace_);
-    EXPECT_EQ(read.failure, "");
-    return read.probes;
+    const Result<std::vector<Probe>> read = probesFor("[" + descriptions + "]", trace_);
+    EXPECT_EQ(read.error.text(), "");
+    return read.value;
   }
 };
 
@@ -60,19 +60,20 @@ TEST_F(ProbeDescriptions, DescriptionsThatAskForNoProbeAreSkipped) {
 }
 
 TEST_F(ProbeDescriptions, WhatIsNoArrayIsAFailure) {
-  EXPECT_EQ(probesFor("{}", trace_).failure, "the descriptions are no JSON array");
-  EXPECT_EQ(probesFor("[", trace_).failure, "the descriptions are no JSON array");
-  EXPECT_EQ(probesFor(std::string((std::size_t{4} << 20U) + 1, ' '), trace_).failure, "the descriptions are too large");
+  EXPECT_EQ(probesFor("{}", trace_).error.text(), "the descriptions are no JSON array");
+  EXPECT_EQ(probesFor("[", trace_).error.text(), "the descriptions are no JSON array");
+  EXPECT_EQ(probesFor(std::string((std::size_t{4} << 20U) + 1, ' '), trace_).error.text(),
+            "the descriptions are too large");
 }
 
 TEST_F(ProbeDescriptions, BoundsAreFailuresBehindThem) {
   const std::string nested = R"([{"name": "a", "children": [{"name": "b", "signpost": "*"}]}])";
-  EXPECT_EQ(probesFor(nested, trace_, {2, 2, 3}).failure, "");
-  EXPECT_EQ(probesFor(nested, trace_, {1, 2, 3}).failure, "there are more than 1 probes");
-  EXPECT_EQ(probesFor(nested, trace_, {2, 1, 3}).failure, "probes nest more than 1 deep");
-  const ReadProbes read = probesFor(nested, trace_, {2, 2, 2});
-  EXPECT_EQ(read.failure, "the probes have more than 2 events");
-  EXPECT_TRUE(read.probes.empty());
+  EXPECT_EQ(probesFor(nested, trace_, {2, 2, 3}).error.text(), "");
+  EXPECT_EQ(probesFor(nested, trace_, {1, 2, 3}).error.text(), "there are more than 1 probes");
+  EXPECT_EQ(probesFor(nested, trace_, {2, 1, 3}).error.text(), "probes nest more than 1 deep");
+  const Result<std::vector<Probe>> read = probesFor(nested, trace_, {2, 2, 2});
+  EXPECT_EQ(read.error.text(), "the probes have more than 2 events");
+  EXPECT_TRUE(read.value.empty());
 }
 
 TEST(ProbePattern, StarsMatchAnyRunAndQuestionMarksAnyCharacter) {

@@ -1,5 +1,5 @@
-// TarnReportingClient: what tarnkit::TarnReportingClient stands on, and the tools with it: the same client with the
-// requests and values of the wire. What it promises stands in its public header.
+// ClientConnection: what tarnkit::TarnReportingClient stands on, and the tools with it: the same client with the
+// requests and values of the wire. What it promises stands in that class's header.
 #pragma once
 
 #include <chrono>
@@ -16,6 +16,7 @@
 #include "client/Reply.h"
 #include "client/Requests.h"
 #include "client/Socket.h"
+#include "plist/Result.h"
 #include "wire/FrameBuffer.h"
 #include "wire/ReplyDecoder.h"
 
@@ -26,26 +27,22 @@ namespace tarn::client {
 using tarnkit::Options;
 using tarnkit::SendStatus;
 
-class TarnReportingClient {
+class ClientConnection {
  public:
   using Milliseconds = std::chrono::milliseconds;
   using LostHandler = std::function<void(const std::string& why)>;
 
-  struct Connected {
-    std::unique_ptr<TarnReportingClient> client;  // null on failure
-    int errorNumber = 0;                          // of the system call that failed
-    std::string error;                            // what failed, with the path
-  };
-  // Connects to the service's socket. Doesn't wait beyond what the kernel does.
+  using Connected = Result<std::unique_ptr<ClientConnection>>;
+  // Connects to the service's socket. Doesn't wait beyond what the kernel does. An error names the path.
   static Connected connect(const std::string& path, const Options& options);
   static Connected connect(const std::string& path) { return connect(path, Options()); }
 
   // Takes over a connected stream socket.
-  TarnReportingClient(Socket socket, const Options& options);
+  ClientConnection(Socket socket, const Options& options);
   // Closes.
-  ~TarnReportingClient();
-  TarnReportingClient(const TarnReportingClient&) = delete;
-  TarnReportingClient& operator=(const TarnReportingClient&) = delete;
+  ~ClientConnection();
+  ClientConnection(const ClientConnection&) = delete;
+  ClientConnection& operator=(const ClientConnection&) = delete;
 
   void setLostHandler(LostHandler handler);
 

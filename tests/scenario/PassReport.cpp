@@ -1,4 +1,4 @@
-#include "tests/scenario/Account.h"
+#include "tests/scenario/PassReport.h"
 
 #include <cstdio>
 #include <fstream>
@@ -21,9 +21,11 @@ std::string meaningOf(const std::string& backend) {
 
 }  // namespace
 
-void printAccount(const std::string& summary, const std::vector<RecordedEvent>& events) {
+void printPassReport(const std::string& summary, const std::vector<RecordedEvent>& events) {
   std::map<std::string, std::size_t> counts;
-  for (const RecordedEvent& event : events) ++counts[event.backend];
+  for (const RecordedEvent& event : events) {
+    ++counts[event.backend];
+  }
   std::string line;
   for (const auto& [backend, count] : counts) {
     line += (line.empty() ? "" : ", ") + meaningOf(backend) + " (" + backend + ") " + std::to_string(count);
@@ -35,12 +37,16 @@ void writeDetails(const std::string& path, const std::string& summary, const std
                   const std::vector<RecordedEvent>& events, const std::vector<const ExpectedEvent*>& matches) {
   std::ofstream file(path, std::ios::app);
   file << "== " << summary << '\n';
-  for (const std::string& difference : differences) file << "difference: " << difference << '\n';
+  for (const std::string& difference : differences) {
+    file << "difference: " << difference << '\n';
+  }
   for (std::size_t index = 0; index < events.size(); ++index) {
     const RecordedEvent& event = events[index];
     file << (matches[index] == nullptr ? "not expected" : matches[index]->origin) << ": " << event.backend << ' '
          << event.name << ' ' << event.payload.dump();
-    if (!event.detail.empty()) file << ' ' << event.detail.dump();
+    if (!event.detail.empty()) {
+      file << ' ' << event.detail.dump();
+    }
     file << '\n';
   }
   if (!file.flush()) throw std::runtime_error(path + ": can't be written");

@@ -1,4 +1,4 @@
-// Account: what a newcomer wants to know of a pass, and the details for who looks for one.
+// PassReport: what a newcomer wants to know of a pass, and the details for who looks for one.
 #pragma once
 
 #include <string>
@@ -10,7 +10,7 @@
 namespace tarn::scenario {
 
 // Two lines to stdout: "summary", and how many events each back-end got.
-void printAccount(const std::string& summary, const std::vector<RecordedEvent>& events);
+void printPassReport(const std::string& summary, const std::vector<RecordedEvent>& events);
 // Adds to the file at `path` the differences, and each event with the line that it matched. Throws std::runtime_error.
 void writeDetails(const std::string& path, const std::string& summary, const std::vector<std::string>& differences,
                   const std::vector<RecordedEvent>& events, const std::vector<const ExpectedEvent*>& matches);

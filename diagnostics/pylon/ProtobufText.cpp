@@ -1,4 +1,4 @@
-#include "diagnostics/pylon/TextLines.h"
+#include "diagnostics/pylon/ProtobufText.h"
 
 #include "plist/ValueView.h"
 
@@ -31,32 +31,32 @@ void appendEscaped(std::string& out, char character) {
 
 }  // namespace
 
-void TextLines::beginLine(std::string_view name) {
+void ProtobufText::beginLine(std::string_view name) {
   text_.append(2 * depth_, ' ');
   text_ += name;
 }
 
-void TextLines::beginObject(std::string_view name) {
+void ProtobufText::beginObject(std::string_view name) {
   beginLine(name);
   text_ += " {\n";
   ++depth_;
 }
 
-void TextLines::formatSigned(std::string_view name, std::int64_t value) {
+void ProtobufText::formatSigned(std::string_view name, std::int64_t value) {
   beginLine(name);
   text_ += ": ";
   tarn::plist::appendNumber(text_, value);
   text_ += '\n';
 }
 
-void TextLines::formatUnsigned(std::string_view name, std::uint64_t value) {
+void ProtobufText::formatUnsigned(std::string_view name, std::uint64_t value) {
   beginLine(name);
   text_ += ": ";
   tarn::plist::appendNumber(text_, value);
   text_ += '\n';
 }
 
-void TextLines::formatString(std::string_view name, std::string_view bytes) {
+void ProtobufText::formatString(std::string_view name, std::string_view bytes) {
   beginLine(name);
   text_ += ": \"";
   for (const char character : bytes) {
@@ -65,7 +65,7 @@ void TextLines::formatString(std::string_view name, std::string_view bytes) {
   text_ += "\"\n";
 }
 
-void TextLines::endObject() {
+void ProtobufText::endObject() {
   --depth_;
   beginLine("}\n");
 }

@@ -1,4 +1,4 @@
-// TextLines: a text rendering for people, in the text format that the Protocol Buffers tools read and print:
+// ProtobufText: a text rendering for people, in the text format that the Protocol Buffers tools read and print:
 //
 //   AudioIssueDetected {
 //     duration: 2
@@ -15,7 +15,7 @@
 
 namespace pylonmetrics {
 
-class TextLines final : public TextFormatter {
+class ProtobufText final : public TextFormatter {
  public:
   void beginObject(std::string_view name) override;
   void formatSigned(std::string_view name, std::int64_t value) override;

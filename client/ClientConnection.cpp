@@ -1,4 +1,4 @@
-#include "client/TarnReportingClient.h"
+#include "client/ClientConnection.h"
 
 #include <algorithm>
 #include <utility>
@@ -9,38 +9,33 @@ namespace tarn::client {
 
 static_assert(Options().maxFrameBytes == wire::kDefaultMaxFrameBytes);
 
-TarnReportingClient::Connected TarnReportingClient::connect(const std::string& path, const Options& options) {
-  Connected connected;
-  Socket socket = Socket::connect(path, connected.errorNumber, connected.error);
-  if (socket.open()) {
-    connected.client = std::make_unique<TarnReportingClient>(std::move(socket), options);
-  }
-  return connected;
+ClientConnection::Connected ClientConnection::connect(const std::string& path, const Options& options) {
+  Result<Socket> socket = Socket::connect(path);
+  if (socket.failed()) return {nullptr, std::move(socket.error)};
+  return {std::make_unique<ClientConnection>(std::move(socket.value), options), {}};
 }
 
-TarnReportingClient::TarnReportingClient(Socket socket, const Options& options)
+ClientConnection::ClientConnection(Socket socket, const Options& options)
     : options_(options), socket_(std::move(socket)), frames_(options.maxReplyBytes) {}
 
-TarnReportingClient::~TarnReportingClient() {
+ClientConnection::~ClientConnection() {
   mustBeOutsideHandlers("destroying the client");
   close();
 }
 
-void TarnReportingClient::setLostHandler(LostHandler handler) {
+void ClientConnection::setLostHandler(LostHandler handler) {
   const OwnerCheck::Use use(owner_);
   lostHandler_ = std::move(handler);
 }
 
-Reply TarnReportingClient::call(const Request& request, std::optional<Milliseconds> timeout) {
+Reply ClientConnection::call(const Request& request, std::optional<Milliseconds> timeout) {
   const OwnerCheck::Use use(owner_);
   mustBeOutsideHandlers("call");
   const Deadline deadline = timeout ? Deadline(Clock::now() + *timeout) : std::nullopt;
   std::optional<Reply> answer;
   ReplyHandler handler = [&answer](Reply&& reply) { answer = std::move(reply); };
   const SendStatus status = sendWithRoom(request, handler);
-  if (status != SendStatus::Sent) {
-    return notSent(status);
-  }
+  if (status != SendStatus::Sent) return notSent(status);
   const std::uint64_t id = nextID_ - 1;
   deliverLeftOvers();
   while (!answer) {
@@ -53,7 +48,7 @@ Reply TarnReportingClient::call(const Request& request, std::optional<Millisecon
   return std::move(*answer);
 }
 
-SendStatus TarnReportingClient::send(const Request& request, ReplyHandler handler) {
+SendStatus ClientConnection::send(const Request& request, ReplyHandler handler) {
   const OwnerCheck::Use use(owner_);
   const SendStatus status = sendWithRoom(request, handler);
   if (status == SendStatus::Sent && outgoing_.size() - written_ >= options_.autoFlushBytes) {
@@ -62,7 +57,7 @@ SendStatus TarnReportingClient::send(const Request& request, ReplyHandler handle
   return status;
 }
 
-SendStatus TarnReportingClient::trySend(const Request& request, ReplyHandler handler) {
+SendStatus ClientConnection::trySend(const Request& request, ReplyHandler handler) {
   const OwnerCheck::Use use(owner_);
   SendStatus status = append(request, handler);
   if (status == SendStatus::Full && wantsToWrite()) {
@@ -75,7 +70,7 @@ SendStatus TarnReportingClient::trySend(const Request& request, ReplyHandler han
   return status;
 }
 
-bool TarnReportingClient::flush() {
+bool ClientConnection::flush() {
   const OwnerCheck::Use use(owner_);
   mustBeOutsideHandlers("flush");
   writeSome();
@@ -85,11 +80,11 @@ bool TarnReportingClient::flush() {
   return connected() && !writeBroken_;
 }
 
-std::size_t TarnReportingClient::dispatch() {
+std::size_t ClientConnection::dispatch() {
   return wait(Milliseconds(0));
 }
 
-std::size_t TarnReportingClient::wait(Milliseconds timeout) {
+std::size_t ClientConnection::wait(Milliseconds timeout) {
   const OwnerCheck::Use use(owner_);
   mustBeOutsideHandlers("dispatch or wait");
   const std::size_t before = delivered_;
@@ -100,7 +95,7 @@ std::size_t TarnReportingClient::wait(Milliseconds timeout) {
   return delivered_ - before;
 }
 
-void TarnReportingClient::close() {
+void ClientConnection::close() {
   const OwnerCheck::Use use(owner_);
   socket_.close();
   outgoing_.clear();
@@ -112,7 +107,7 @@ void TarnReportingClient::close() {
 }
 
 // Sends, waiting for room where that is allowed and can come.
-SendStatus TarnReportingClient::sendWithRoom(const Request& request, ReplyHandler& handler) {
+SendStatus ClientConnection::sendWithRoom(const Request& request, ReplyHandler& handler) {
   SendStatus status = append(request, handler);
   const bool isStart = request.operation == wire::Operation::StartReportingSessionForID;
   while (status == SendStatus::Full && !delivering_ && !(isStart && countsAreFull(request))) {
@@ -122,20 +117,16 @@ SendStatus TarnReportingClient::sendWithRoom(const Request& request, ReplyHandle
   return status;
 }
 
-bool TarnReportingClient::countsAreFull(const Request& request) const noexcept {
+bool ClientConnection::countsAreFull(const Request& request) const noexcept {
   return request.operation == wire::Operation::StartReportingSessionForID
              ? pending_.heldCount() >= options_.maxOutstanding
              : pending_.waitingCount() >= options_.maxOutstanding;
 }
 
 // Puts the request in line or leaves everything, the handler too, as it was.
-SendStatus TarnReportingClient::append(const Request& request, ReplyHandler& handler) {
-  if (!connected() || writeBroken_) {
-    return SendStatus::NotConnected;
-  }
-  if (countsAreFull(request)) {
-    return SendStatus::Full;
-  }
+SendStatus ClientConnection::append(const Request& request, ReplyHandler& handler) {
+  if (!connected() || writeBroken_) return SendStatus::NotConnected;
+  if (countsAreFull(request)) return SendStatus::Full;
   const std::size_t before = outgoing_.size();
   wire::Encoder(outgoing_).request(nextID_, request);
   const bool tooLarge = outgoing_.size() - before - wire::kFrameHeaderBytes > options_.maxFrameBytes;
@@ -147,7 +138,7 @@ SendStatus TarnReportingClient::append(const Request& request, ReplyHandler& han
   return SendStatus::Sent;
 }
 
-void TarnReportingClient::writeSome() {
+void ClientConnection::writeSome() {
   while (wantsToWrite() && connected()) {
     const std::ptrdiff_t sent = socket_.sendSome(std::string_view(outgoing_).substr(written_));
     if (sent < 0) {
@@ -165,7 +156,7 @@ void TarnReportingClient::writeSome() {
   }
 }
 
-void TarnReportingClient::readSome(bool mayWait) {
+void ClientConnection::readSome(bool mayWait) {
   while (connected()) {
     const std::span<std::byte> space = frames_.space();
     const std::ptrdiff_t received = socket_.receiveSome(space, mayWait);
@@ -175,14 +166,12 @@ void TarnReportingClient::readSome(bool mayWait) {
     }
     frames_.received(static_cast<std::size_t>(received));
     takeFrames();
-    if (static_cast<std::size_t>(received) < space.size()) {
-      return;
-    }
+    if (static_cast<std::size_t>(received) < space.size()) return;
     mayWait = false;
   }
 }
 
-void TarnReportingClient::takeFrames() {
+void ClientConnection::takeFrames() {
   std::span<const std::byte> frame;
   wire::DecodedReply decoded;
   std::string reason;
@@ -204,7 +193,7 @@ void TarnReportingClient::takeFrames() {
   }
 }
 
-void TarnReportingClient::takeReply(wire::DecodedReply& decoded) {
+void ClientConnection::takeReply(wire::DecodedReply& decoded) {
   ReplyHandler handler;
   if (!pending_.take(decoded.id, decoded.error.has_value(), handler)) {
     ++unmatchedReplies_;
@@ -221,7 +210,7 @@ void TarnReportingClient::takeReply(wire::DecodedReply& decoded) {
 }
 
 // One round: write what can be, wait, read what is there, deliver.
-void TarnReportingClient::exchange(const Deadline& deadline) {
+void ClientConnection::exchange(const Deadline& deadline) {
   writeSome();
   const bool writing = wantsToWrite();
   if (connected() && !writing && !deadline) {
@@ -239,17 +228,15 @@ void TarnReportingClient::exchange(const Deadline& deadline) {
   deliverLeftOvers();
 }
 
-void TarnReportingClient::deliver(const ReplyHandler& handler, Reply&& reply) {
-  if (!handler) {
-    return;
-  }
+void ClientConnection::deliver(const ReplyHandler& handler, Reply&& reply) {
+  if (!handler) return;
   delivering_ = true;
   handler(std::move(reply));
   delivering_ = false;
   ++delivered_;
 }
 
-void TarnReportingClient::deliverCancelled() {
+void ClientConnection::deliverCancelled() {
   ReplyHandler handler;
   while (pending_.takeCancelled(handler)) {
     deliver(handler, failure(Outcome::Cancelled, "the reply can never come"));
@@ -257,11 +244,9 @@ void TarnReportingClient::deliverCancelled() {
 }
 
 // What became certain without a reply: starts that are never answered, and the end of the connection.
-void TarnReportingClient::deliverLeftOvers() {
+void ClientConnection::deliverLeftOvers() {
   deliverCancelled();
-  if (ending_ == Ending::None) {
-    return;
-  }
+  if (ending_ == Ending::None) return;
   const bool lost = std::exchange(ending_, Ending::None) == Ending::Lost;
   for (PendingReplies::Rest& rest : pending_.takeAll()) {
     if (rest.killedService && lost) {
@@ -279,7 +264,7 @@ void TarnReportingClient::deliverLeftOvers() {
 }
 
 // The handlers hear of it in deliverLeftOvers, when no other handler is running.
-void TarnReportingClient::lose(std::string why) {
+void ClientConnection::lose(std::string why) {
   socket_.close();
   outgoing_.clear();
   written_ = 0;
@@ -287,7 +272,7 @@ void TarnReportingClient::lose(std::string why) {
   lostWhy_ = std::move(why);
 }
 
-void TarnReportingClient::mustBeOutsideHandlers(const char* operation) const noexcept {
+void ClientConnection::mustBeOutsideHandlers(const char* operation) const noexcept {
   if (delivering_) {
     OwnerCheck::failInsideHandler(operation);
   }
