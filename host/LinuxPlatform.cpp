@@ -90,6 +90,13 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
   workQueues_.setRoomHandler([this] { connections_.resumeRequests(); });
   connections_.gate.setPauseSource([this] { return recorder_.isFull() || workQueues_.isFull(); });
   loop_.addTurnHook([this] { lookForTheEnd(); });
+  if (recorderEnabled_) {
+    // What was sent may still be on its way through the workers' own queues.
+    connections_.setSettleSource([this](platform::Work done) {
+      workQueues_.afterWhatIsUnfinished(
+          [this, done = std::move(done)]() mutable { recorder_.settle(loop_.queue(), std::move(done)); });
+    });
+  }
 }
 
 platform::Facilities LinuxPlatform::facilitiesOf() {
@@ -138,12 +145,12 @@ Status LinuxPlatform::start() {
 }
 
 Status LinuxPlatform::listen(ListenSocket socket, const std::shared_ptr<platform::ListenerDelegate>& delegate,
-                             SessionCount sessionCount) {
+                             ServiceCount serviceCounts) {
   if (Status listening = socket.listen(); listening.failed()) {
     recorder_.shutdown();
     return listening;
   }
-  sessionCount_ = std::move(sessionCount);
+  serviceCounts_ = std::move(serviceCounts);
   connections_.setStatusSource([this] { return status(); });
   listener_ = std::make_shared<SocketListener>(connections_, std::move(socket));
   listener_->setDelegate(delegate);
@@ -166,7 +173,7 @@ void LinuxPlatform::endClients(platform::UniqueFunction<void()> clientsAreGone) 
 
 // Once a turn: when the last client's end was served, the loop may stop.
 void LinuxPlatform::lookForTheEnd() {
-  if (!clientsAreGone_ || connections_.ledger.connectionsOpen != 0 || loop_.queue()->ready() != 0) return;
+  if (!clientsAreGone_ || connections_.ledger.connectionsOpen != 0 || loop_.queue()->waiting() != 0) return;
   // As work of the queue, which is where sessions are stopped.
   loop_.queue()->async([this, gone = std::exchange(clientsAreGone_, {})]() mutable {
     gone();
@@ -192,12 +199,14 @@ void LinuxPlatform::giveUpClients() {
 void LinuxPlatform::serve() {
   loop_.run();
   endDeadline_.cancel();
-  loop_.queue()->run(std::numeric_limits<std::size_t>::max());  // requests that were taken are served
+  loop_.queue()->run(std::numeric_limits<std::size_t>::max());
+  connections_.shares.finishWork();  // requests that were taken are served
   loop_.flushAll();
   end();
 }
 
 void LinuxPlatform::exitProcess(int status) {
+  connections_.gathersReplies = false;
   loop_.flushAll();  // the replies to what came before
   end();
   std::_Exit(status);
@@ -205,9 +214,12 @@ void LinuxPlatform::exitProcess(int status) {
 
 plist::Dictionary LinuxPlatform::status() {
   const recorder::RecorderCounters counters = recorder_.counters();
-  return connections_.ledger.status(sessionCount_(), loop_.queue()->waiting() + workQueues_.unfinished(),
-                                    {counters.handedOver, counters.committed, counters.waiting, counters.expired,
-                                     counters.failed, counters.lostBefore});
+  plist::Dictionary status =
+      connections_.ledger.status(serviceCounts_(), loop_.queue()->waiting() + workQueues_.unfinished(),
+                                 {counters.handedOver, counters.committed, counters.waiting, counters.expired,
+                                  counters.failed, counters.lostBefore});
+  status.set("quotas", quotaStatus(connections_.limits.quotas, connections_.shares));
+  return status;
 }
 
 // Takes no more, and makes safe what was taken.

@@ -61,8 +61,8 @@ namespace tarn::linux_host {
 
 class LinuxPlatform final : private platform::ProcessControl {
  public:
-  // How many sessions there are; asked on the loop's thread.
-  using SessionCount = platform::UniqueFunction<std::size_t()>;
+  // What the service counts; asked on the loop's thread.
+  using ServiceCount = platform::UniqueFunction<ServiceCounts()>;
   // What was there before; all of it outlives the platform.
   struct Ground {
     platform::Clock& clock;
@@ -86,7 +86,7 @@ class LinuxPlatform final : private platform::ProcessControl {
   [[nodiscard]] Status start();
   // Lets clients connect, once whoever they are handed to is whole.
   [[nodiscard]] Status listen(ListenSocket socket, const std::shared_ptr<platform::ListenerDelegate>& delegate,
-                              SessionCount sessionCount);
+                              ServiceCount serviceCounts);
   // Takes nobody and nothing more in, serves what each client had sent and then its end, calls `clientsAreGone` and
   // stops the loop. What isn't over by `HostLimits::endTime` is left: what the recorder holds is committed then and the
   // process ends with status 0, whatever the queue is at. A second call does nothing. On the loop's thread, from work
@@ -143,7 +143,7 @@ class LinuxPlatform final : private platform::ProcessControl {
   LinuxPerfDataWriters perfDataWriters_;
   JsonDeviceProperties deviceProperties_;
   Watchdog watchdog_;
-  SessionCount sessionCount_;
+  ServiceCount serviceCounts_;
   std::shared_ptr<SocketListener> listener_;
   platform::UniqueFunction<void()> clientsAreGone_;  // set while the clients' ends are served
   bool ending_ = false;

@@ -5,6 +5,7 @@
 // called at most once, on the server queue; a reply that is destroyed uncalled will never come.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <optional>
 #include <string>
@@ -57,6 +58,13 @@ class TarnReportingServiceProtocol {
   virtual void getAllReporters(Reply<std::vector<std::int64_t>> reply) = 0;
   // Ends the process at once, without a reply.
   virtual void killService() = 0;
+
+  // No remote operations: what the client has now, for whoever bounds that. Threads: the server queue's.
+  virtual std::size_t sessionCount() const { return 0; }
+  virtual bool hasSession(std::int64_t reporterID) const {
+    static_cast<void>(reporterID);
+    return false;
+  }
 };
 
 }  // namespace tarn::platform

@@ -27,6 +27,16 @@ class WorkQueue {
   virtual bool isCurrent() const noexcept = 0;
   // Pieces of work handed over and not yet begun; delayed ones count from their moment on.
   virtual std::size_t waiting() const noexcept = 0;
+
+  // For work that is long by nature and is done in slices, as work of this queue. Charges so much to whoever it is done
+  // for, a unit being about a microsecond. True: others are to have their turn, and what is left goes to asyncNext().
+  virtual bool spend(std::size_t cost) {
+    static_cast<void>(cost);
+    return false;
+  }
+  // Runs the rest of the work that runs now when its turn comes again, ahead of what was handed over for the same
+  // client. Only after spend() was true, and as the last thing the work does.
+  virtual void asyncNext(Work rest) { async(std::move(rest)); }
 };
 
 // A serial queue whose work can wait for something without holding a thread.

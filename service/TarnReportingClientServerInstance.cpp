@@ -7,6 +7,7 @@
 #include "platform/TracePoints.h"
 #include "platform/WorkQueue.h"
 #include "service/TarnReportingServiceDelegateProtocol.h"
+#include "service/TarnReportingSessionIndex.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
 #include "service/vocabulary/TarnReportingServerQueue.h"
@@ -29,6 +30,13 @@ constexpr std::uint32_t kTraceStart = 0x21044818;
 constexpr std::uint32_t kTraceStop = 0x2104481C;
 constexpr std::uint32_t kTraceSend = 0x21044824;
 
+// What long work costs, in units of about a microsecond.
+constexpr std::size_t kDeliveryCost = 2;
+constexpr std::size_t kStopCost = 32;
+constexpr std::size_t kMessagesPerStopCost = 2;  // of the stopped session's log
+constexpr std::size_t kRemovalsAtOnce = 4;       // sessions that are released in a unit's time and some
+constexpr std::size_t kListedAtOnce = 64;        // IDs that are listed in one
+
 void trace(std::uint32_t code, std::int64_t reporterID) {
   TarnReportingFacilities().tracePoints.emit(code, reporterID);
 }
@@ -40,6 +48,15 @@ TarnReportingSignpost operation(std::string_view verb, platform::SignpostArgumen
 
 void onServerQueue(platform::Work work) {
   TarnReportingUtilityGetReportingServerQueue()->async(std::move(work));
+}
+
+// Whether others are to have their turn before work goes on that has cost so much more.
+bool spend(std::size_t cost) {
+  return TarnReportingUtilityGetReportingServerQueue()->spend(cost);
+}
+
+void continueLater(platform::Work rest) {
+  TarnReportingUtilityGetReportingServerQueue()->asyncNext(std::move(rest));
 }
 
 // Sends the reply that a start call left with the session, if there is one.
@@ -57,7 +74,41 @@ plist::ValueView textOf(const platform::ReporterIDs& reporterIDs, plist::Array& 
   return storage;
 }
 
+// What became of a record that so many workers got.
+TarnReportingOutcome outcomeOf(const TarnReportingSessionMessage& record, std::size_t workers) {
+  if (record.isRedundant()) return TarnReportingOutcome::Redundant;
+  return workers != 0 ? TarnReportingOutcome::Delivered : TarnReportingOutcome::Unwanted;
+}
+
+// The better of two sessions' outcomes of one message.
+void improve(TarnReportingOutcome& outcome, TarnReportingOutcome another) {
+  outcome = std::min(outcome, another);
+}
+
 }  // namespace
+
+// A message on its way to its sessions.
+struct TarnReportingClientServerInstance::Delivery {
+  plist::Dictionary message;
+  std::uint32_t category;
+  std::uint16_t type;
+  platform::Reply<> reply;
+  TarnReportingServiceDelegateProtocol::SessionSearch search;
+  bool found = false;    // the search is over
+  bool gaveWay = false;  // others' work was done since then
+  std::size_t next = 0;  // of the sessions that were found
+  TarnReportingOutcome outcome = TarnReportingOutcome::WithoutSession;
+
+  bool toWhoeverRuns() const { return !search.reporterIDs || search.reporterIDs->empty(); }
+};
+
+// The listing of all reporter IDs.
+struct TarnReportingClientServerInstance::Listing {
+  platform::Reply<std::vector<std::int64_t>> reply;
+  std::vector<std::int64_t> reporters;
+  std::uint64_t client = 0;                 // the number of the one whose sessions are listed
+  TarnReportingSessionMap::Place from = 0;  // among its sessions
+};
 
 std::shared_ptr<TarnReportingClientServerInstance> TarnReportingClientServerInstance::initWithPID(
     std::int32_t processIdentifier, std::weak_ptr<TarnReportingServiceDelegateProtocol> delegate) {
@@ -76,6 +127,9 @@ TarnReportingClientServerInstance::TarnReportingClientServerInstance(
 
 TarnReportingClientServerInstance::~TarnReportingClientServerInstance() {
   kLog(LogLevel::Default, "dealloc %i from the server client list", processIdentifier_);
+  while (const auto session = sessions_.first()) {
+    removeSession(session->reporterID());
+  }
 }
 
 void TarnReportingClientServerInstance::createReportingSession(std::int64_t reporterID, platform::Acknowledge reply) {
@@ -135,10 +189,11 @@ void TarnReportingClientServerInstance::sendMessage(plist::Dictionary message, s
       message.set("sendSingleMessage", true);
     }
   }
-  onServerQueue([self = shared_from_this(), message = std::move(message), category, type,
-                 reporterIDs = std::move(reporterIDs), reply = std::move(reply)]() mutable {
-    const auto signpost = operation("sendMessage", {"category", category});
-    self->send(std::move(message), category, type, reporterIDs, reply);
+  onServerQueue([self = shared_from_this(),
+                 delivery = Delivery{
+                     std::move(message), category, type, std::move(reply), {std::move(reporterIDs), {}}}]() mutable {
+    const auto signpost = operation("sendMessage", {"category", delivery.category});
+    self->beginToSend(delivery);
   });
 }
 
@@ -173,15 +228,8 @@ void TarnReportingClientServerInstance::reporterID(std::int64_t reporterID, plat
 void TarnReportingClientServerInstance::getAllReporters(platform::Reply<std::vector<std::int64_t>> reply) {
   onServerQueue([self = shared_from_this(), reply = std::move(reply)]() mutable {
     const auto signpost = operation("getAllReporters");
-    std::vector<std::int64_t> reporters;
-    if (const auto service = self->delegate_.lock()) {
-      for (const auto& client : service->getAllClients()) {
-        client->sessions_.forEach([&](std::int64_t reporterID, const std::shared_ptr<TarnReportingSession>&) {
-          reporters.push_back(reporterID);
-        });
-      }
-    }
-    reply(std::nullopt, std::move(reporters));
+    Listing listing{std::move(reply), {}};
+    self->continueListing(listing);
   });
 }
 
@@ -218,6 +266,54 @@ std::shared_ptr<TarnReportingSession> TarnReportingClientServerInstance::makeSes
   return session;
 }
 
+void TarnReportingClientServerInstance::setSessionIndex(std::shared_ptr<TarnReportingSessionIndex> index,
+                                                        std::uint64_t number) {
+  index_ = std::move(index);
+  number_ = number;
+  // A platform may deliver requests before the service's own work lists the client.
+  sessions_.forEach([this](std::int64_t reporterID, const std::shared_ptr<TarnReportingSession>&) {
+    index_->add(reporterID, number_, *this);
+  });
+  index_->addRunning(static_cast<std::ptrdiff_t>(sessions_.runningCount()));
+}
+
+void TarnReportingClientServerInstance::storeSession(std::int64_t reporterID,
+                                                     std::shared_ptr<TarnReportingSession> session) {
+  const std::size_t running = sessions_.runningCount();
+  const bool isNew = sessions_.store(reporterID, std::move(session));
+  if (index_ != nullptr) {
+    index_->addRunning(static_cast<std::ptrdiff_t>(sessions_.runningCount() - running));
+    if (isNew) {
+      index_->add(reporterID, number_, *this);
+    }
+  }
+}
+
+void TarnReportingClientServerInstance::removeSession(std::int64_t reporterID) {
+  const auto session = sessions_.find(reporterID);
+  if (session == nullptr) return;
+  const std::size_t running = sessions_.runningCount();
+  sessions_.remove(reporterID);
+  if (index_ != nullptr) {
+    index_->addRunning(static_cast<std::ptrdiff_t>(sessions_.runningCount() - running));
+    index_->remove(reporterID, number_);
+  }
+}
+
+void TarnReportingClientServerInstance::noteRunning(const TarnReportingSession& session) {
+  const std::size_t running = sessions_.runningCount();
+  sessions_.setRunning(session.reporterID(), session.started());
+  if (index_ != nullptr) {
+    index_->addRunning(static_cast<std::ptrdiff_t>(sessions_.runningCount() - running));
+  }
+}
+
+void TarnReportingClientServerInstance::stopSession(TarnReportingSession& session) {
+  spend(session.messages().size() / kMessagesPerStopCost);
+  session.stop();
+  noteRunning(session);
+}
+
 void TarnReportingClientServerInstance::logReportingSessions() {
   if (const auto service = delegate_.lock()) {
     service->logReportingSessions();
@@ -227,7 +323,7 @@ void TarnReportingClientServerInstance::logReportingSessions() {
 void TarnReportingClientServerInstance::create(std::int64_t reporterID) {
   kLog(LogLevel::Default, "creating session for reporter %lli", reporterID);
   trace(kTraceCreate, reporterID);
-  sessions_.store(reporterID, makeSession(reporterID));
+  storeSession(reporterID, makeSession(reporterID));
   kLog(LogLevel::Default, "session created for reporter %lli", reporterID);
 }
 
@@ -243,7 +339,7 @@ void TarnReportingClientServerInstance::retype(std::uint16_t serviceType, std::i
     replacement->updateConfigurationWithContentsOfConfiguration(&session->configuration());
     replacement->previousValues().merge(session->previousValues());
     replacement->setServiceType(type);
-    sessions_.store(reporterID, replacement);
+    storeSession(reporterID, replacement);
   }
   kLog(LogLevel::Default, "service type %i set for reporter  %lli", serviceType, reporterID);
 }
@@ -260,6 +356,7 @@ void TarnReportingClientServerInstance::start(std::int64_t reporterID, platform:
     return;  // the reply of the first start stands for both
   }
   session->start();
+  noteRunning(*session);
   sendHeldReply(*session);
   session->transactionCompleteBlock() = std::move(reply);
   if (session->serviceType() == AudioServiceType::Test && TarnReportingUtilityIsInternalBuild()) {
@@ -274,7 +371,7 @@ void TarnReportingClientServerInstance::stop(std::int64_t reporterID) {
   if (reporterID == 0) return;
   const auto session = findReportingSessionForID(reporterID, false);
   if (session && session->started()) {
-    session->stop();
+    stopSession(*session);
     sendHeldReply(*session);
     logReportingSessions();
   } else {
@@ -290,36 +387,86 @@ void TarnReportingClientServerInstance::stop(std::int64_t reporterID) {
 void TarnReportingClientServerInstance::destroy(std::int64_t reporterID) {
   kLog(LogLevel::Default, "destroying session for reporter %lli", reporterID);
   if (const auto session = sessions_.find(reporterID); session && session->started()) {
-    session->stop();
+    stopSession(*session);
   }
-  sessions_.remove(reporterID);
+  removeSession(reporterID);
   kLog(LogLevel::Default, "destroying %lli", reporterID);
   logReportingSessions();
 }
 
-void TarnReportingClientServerInstance::send(plist::Dictionary message, std::uint32_t category, std::uint16_t type,
-                                             const platform::ReporterIDs& reporterIDs, platform::Reply<>& reply) {
+void TarnReportingClientServerInstance::beginToSend(Delivery& delivery) {
   plist::Array storage;
-  kLog(LogLevel::Debug, "sending message for reporter %@", [&] { return textOf(reporterIDs, storage); });
+  kLog(LogLevel::Debug, "sending message for reporter %@",
+       [&] { return textOf(delivery.search.reporterIDs, storage); });
   trace(kTraceSend, processIdentifier_);
   const auto service = delegate_.lock();
   if (!service || !service->isReportingEnabled()) {
-    reply(platform::RemoteError{kErrorDomain, kReportingDisabled, "reporting is disabled"});
+    if (service) {
+      service->countMessage(TarnReportingOutcome::Refused);
+    }
+    delivery.reply(platform::RemoteError{kErrorDomain, kReportingDisabled, "reporting is disabled"});
     return;
   }
-  const auto sessions = service->findReportingSessionsForIDs(reporterIDs);
-  const auto sendTo = [category, type](TarnReportingSession& session, plist::Dictionary own) {
-    session.sendMessage(std::make_shared<TarnReportingSessionMessage>(
-        std::move(own), static_cast<AudioEventCategory>(category), static_cast<AudioEventType>(type)));
+  continueSending(delivery);
+}
+
+void TarnReportingClientServerInstance::continueSending(Delivery& delivery) {
+  const auto service = delegate_.lock();
+  if (!service) return;
+  const auto giveWay = [&] {
+    delivery.gaveWay = delivery.found;
+    continueLater([self = shared_from_this(), delivery = std::move(delivery)]() mutable { self->continueSending(delivery); });
   };
-  // Each session changes its own; the last one, mostly the only one, needs no copy for it.
-  for (std::size_t i = 0; i + 1 < sessions.size(); ++i) {
-    sendTo(*sessions[i], message);
+  delivery.found = delivery.found || service->findNextSessions(delivery.search);
+  if (!delivery.found) {
+    giveWay();
+    return;
   }
-  if (!sessions.empty()) {
-    sendTo(*sessions.back(), std::move(message));
+  auto& sessions = delivery.search.found;
+  while (delivery.next < sessions.size()) {
+    const std::shared_ptr<TarnReportingSession> session = std::move(sessions[delivery.next++]);
+    const bool isLast = delivery.next == sessions.size();
+    if (delivery.gaveWay && delivery.toWhoeverRuns() && !session->started()) {
+      improve(delivery.outcome, TarnReportingOutcome::Undeliverable);  // it was stopped meanwhile
+    } else {
+      // Each session changes its own; the last one, mostly the only one, needs no copy for it.
+      const auto record = std::make_shared<TarnReportingSessionMessage>(
+          isLast ? std::move(delivery.message) : delivery.message, static_cast<AudioEventCategory>(delivery.category),
+          static_cast<AudioEventType>(delivery.type));
+      improve(delivery.outcome, outcomeOf(*record, session->sendMessage(record)));
+    }
+    if (!isLast && spend(kDeliveryCost)) {
+      giveWay();
+      return;
+    }
   }
-  reply(std::nullopt);
+  service->countMessage(delivery.outcome);
+  delivery.reply(std::nullopt);
+}
+
+void TarnReportingClientServerInstance::continueListing(Listing& listing) {
+  const auto service = delegate_.lock();
+  if (!service) {
+    listing.reply(std::nullopt, {});
+    return;
+  }
+  const auto& clients = service->sessionIndex().clients();
+  for (auto entry = clients.lower_bound(listing.client); entry != clients.end(); ++entry) {
+    if (entry->first != listing.client) {
+      listing.client = entry->first;
+      listing.from = 0;
+    }
+    const bool whole = entry->second->sessions_.forEachFrom(listing.from, [&](std::int64_t reporterID) {
+      listing.reporters.push_back(reporterID);
+      return listing.reporters.size() % kListedAtOnce != 0 || !spend(1);
+    });
+    if (!whole) {
+      continueLater([self = shared_from_this(), listing = std::move(listing)]() mutable { self->continueListing(listing); });
+      return;
+    }
+  }
+  spend(listing.reporters.size() / kListedAtOnce);  // what the reply takes
+  listing.reply(std::nullopt, std::move(listing.reporters));
 }
 
 void TarnReportingClientServerInstance::endClient() {
@@ -329,15 +476,24 @@ void TarnReportingClientServerInstance::endClient() {
   const bool isListed =
       std::any_of(clients.begin(), clients.end(), [&](const auto& client) { return client.get() == this; });
   if (!isListed) return;
-  if (const auto end = service->clientEnd(); end != TarnReportingClientEnd::ClientGone) {
+  if (const auto end = service->clientEnd(); end != TarnReportingClientEnd::ClientGone && !std::exchange(endTold_, true)) {
     kLog(LogLevel::Default, "ending client %i. reason=%s", processIdentifier_, TarnReportingClientEndName(end));
   }
-  sessions_.forEach([](std::int64_t, const std::shared_ptr<TarnReportingSession>& session) {
-    if (session->started()) {
-      session->stop();
+  const auto rest = [self = shared_from_this()] { self->endClient(); };
+  while (const auto session = sessions_.firstRunning()) {
+    stopSession(*session);
+    if (sessions_.size() > 1 && spend(kStopCost)) {
+      continueLater(rest);
+      return;
     }
-  });
-  sessions_.clear();
+  }
+  while (const auto session = sessions_.first()) {
+    removeSession(session->reporterID());
+    if (sessions_.size() % kRemovalsAtOnce == 1 && spend(kRemovalsAtOnce)) {
+      continueLater(rest);
+      return;
+    }
+  }
   service->removeClient(*this);
   kLog(LogLevel::Default, "removing %i from the server client list", processIdentifier_);
 }

@@ -17,6 +17,7 @@ namespace tarn {
 
 class TarnReportingServiceDelegateProtocol;
 class TarnReportingSession;
+class TarnReportingSessionIndex;
 
 class TarnReportingClientServerInstance : public platform::TarnReportingServiceProtocol,
                                           public std::enable_shared_from_this<TarnReportingClientServerInstance> {
@@ -39,6 +40,8 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
   void reporterID(std::int64_t reporterID, platform::Reply<plist::Dictionary> reply) override;
   void getAllReporters(platform::Reply<std::vector<std::int64_t>> reply) override;
   void killService() override;
+  std::size_t sessionCount() const override { return sessions_.size(); }
+  bool hasSession(std::int64_t reporterID) const override { return sessions_.find(reporterID) != nullptr; }
 
   // Ends the client: on the server queue, stops its started sessions, drops all of them and leaves the service's list.
   // A second call does nothing. Threads: any.
@@ -55,11 +58,21 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
   // Empty while it is not known; set by the service.
   const std::string& clientProcessName() const noexcept { return clientProcessName_; }
   void setClientProcessName(std::string name) { clientProcessName_ = std::move(name); }
+  // What the client's sessions are told to, and the client's number in it; set by the service, once.
+  void setSessionIndex(std::shared_ptr<TarnReportingSessionIndex> index, std::uint64_t number);
 
  private:
+  struct Delivery;
+  struct Listing;
+
   TarnReportingClientServerInstance(std::int32_t processIdentifier,
                                     std::weak_ptr<TarnReportingServiceDelegateProtocol> delegate);
   std::shared_ptr<TarnReportingSession> makeSession(std::int64_t reporterID);
+  void storeSession(std::int64_t reporterID, std::shared_ptr<TarnReportingSession> session);
+  void removeSession(std::int64_t reporterID);
+  void noteRunning(const TarnReportingSession& session);
+  // Stops the session and charges what that costs.
+  void stopSession(TarnReportingSession& session);
   void logReportingSessions();
 
   // The operations' work, on the server queue.
@@ -68,8 +81,10 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
   void start(std::int64_t reporterID, platform::Acknowledge reply);
   void stop(std::int64_t reporterID);
   void destroy(std::int64_t reporterID);
-  void send(plist::Dictionary message, std::uint32_t category, std::uint16_t type,
-            const platform::ReporterIDs& reporterIDs, platform::Reply<>& reply);
+  // Those of the long ones go on until they are done or others are to have their turn, and then hand over the rest.
+  void beginToSend(Delivery& delivery);
+  void continueSending(Delivery& delivery);
+  void continueListing(Listing& listing);
   void endClient();
 
   const std::int32_t processIdentifier_;
@@ -79,6 +94,9 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
   std::optional<double> clientStartDate_;
   std::string clientProcessName_;
   TarnReportingSessionMap sessions_;
+  std::shared_ptr<TarnReportingSessionIndex> index_;
+  std::uint64_t number_ = 0;  // in the index
+  bool endTold_ = false;
 };
 
 }  // namespace tarn

@@ -25,20 +25,44 @@ constexpr std::string_view kUptimeEvent = "sys.oxbow.tarnkit.tarnreportingclient
 constexpr std::int64_t kSingleMessageReporterID = 1;
 constexpr std::chrono::duration<double> kTimeout(TarnReportingService::kSingleMessageSessionTimeoutSeconds);
 
-// Every start, stop and message without IDs logs these lists. So that a client with thousands of running sessions can't
-// slow down the others or fill the disk with them, a long one ends in the count of those that it leaves out.
-plist::Array descriptions(const TarnReportingServiceDelegateProtocol::Sessions& sessions) {
-  constexpr std::size_t kMostListed = 32;
-  const std::size_t listed = sessions.size() <= kMostListed ? sessions.size() : kMostListed - 1;
-  plist::Array texts;
-  for (std::size_t i = 0; i < listed; ++i) {
-    texts.append(sessions[i]->description());
+// Every start, stop and message without IDs logs lists of sessions, client by client and all together. So that clients
+// with thousands of running sessions, and thousands of clients, can't slow down the others or fill the disk with them,
+// a long list ends in the count of what it leaves out, and all texts of a call together are bounded.
+constexpr std::size_t kMostListed = 32;
+constexpr std::size_t kMostListedBytes = 32768;
+// Unknown IDs of one message that have an error line of their own.
+constexpr std::size_t kMostUnknownListed = 8;
+// IDs that are looked up, at a cost of about a microsecond, before others may have their turn.
+constexpr std::size_t kLookUpsAtOnce = 16;
+
+class SessionTexts {
+ public:
+  // The descriptions of the sessions, `count` in all, that `forEach` visits.
+  template <class ForEach>
+  plist::Array of(std::size_t count, ForEach forEach) {
+    const std::size_t most = count <= kMostListed ? count : kMostListed - 1;
+    plist::Array texts;
+    forEach([&](const std::shared_ptr<TarnReportingSession>& session) {
+      if (texts.size() == most) return false;
+      const std::string text = session->description();
+      if (text.size() > bytesLeft_) {
+        bytesLeft_ = 0;
+        return false;
+      }
+      bytesLeft_ -= text.size();
+      texts.append(text);
+      return true;
+    });
+    if (texts.size() < count) {
+      texts.append("and " + std::to_string(count - texts.size()) + " more");
+    }
+    return texts;
   }
-  if (listed < sessions.size()) {
-    texts.append("and " + std::to_string(sessions.size() - listed) + " more");
-  }
-  return texts;
-}
+  bool exhausted() const noexcept { return bytesLeft_ == 0; }
+
+ private:
+  std::size_t bytesLeft_ = kMostListedBytes;
+};
 
 plist::ValueView nameOf(const TarnReportingClientServerInstance& client) {
   const std::string& name = client.clientProcessName();
@@ -74,7 +98,7 @@ std::shared_ptr<TarnReportingService> TarnReportingService::create() {
   return service;
 }
 
-TarnReportingService::TarnReportingService() = default;
+TarnReportingService::TarnReportingService() : index_(std::make_shared<TarnReportingSessionIndex>()) {}
 
 TarnReportingService::~TarnReportingService() {
   kLog(LogLevel::Default, "destroying service");
@@ -93,6 +117,7 @@ bool TarnReportingService::listenerShouldAcceptNewConnection(const std::shared_p
     client->setClientStartDate(TarnReportingFacilities().clock.epochSeconds());
     client->setClientProcessName(TarnReportingFacilities().processFacts.processName(processIdentifier).value_or(""));
     const MutexLock lock(self->mutex_);
+    client->setSessionIndex(self->index_, self->nextClientNumber_++);
     self->clients_.push_back(client);
   });
   const std::weak_ptr<TarnReportingClientServerInstance> weakClient = client;
@@ -131,52 +156,98 @@ void TarnReportingService::handleInvalidation(const std::weak_ptr<TarnReportingC
 
 TarnReportingService::Sessions TarnReportingService::getAllActiveReportingSessions() {
   TarnReportingRequireServerQueue();
+  logSessionsOfClients();
   Sessions active;
-  for (const auto& client : getAllClients()) {
-    Sessions ofClient;
-    client->clientReportingSessionMap().forEach(
-        [&](std::int64_t, const std::shared_ptr<TarnReportingSession>& session) {
-          if (session->started()) {
-            ofClient.push_back(session);
-          }
-        });
-    kLog(LogLevel::Default, "sessions for client %i : %@", client->processIdentifier(),
-         [&] { return descriptions(ofClient); });
-    active.insert(active.end(), ofClient.begin(), ofClient.end());
+  active.reserve(index_->runningCount());
+  for (const auto& [number, client] : index_->clients()) {
+    client->clientReportingSessionMap().forEachRunning([&](const std::shared_ptr<TarnReportingSession>& session) {
+      active.push_back(session);
+      return true;
+    });
   }
   return active;
+}
+
+// A line for each client; of many, for the first of those that have sessions, and one that counts the rest.
+void TarnReportingService::logSessionsOfClients() const {
+  SessionTexts texts;
+  const auto logClient = [&texts](const TarnReportingClientServerInstance& client) {
+    kLog(LogLevel::Default, "sessions for client %i : %@", client.processIdentifier(), [&] {
+      const TarnReportingSessionMap& sessions = client.clientReportingSessionMap();
+      return texts.of(sessions.runningCount(), [&](auto visit) { sessions.forEachRunning(visit); });
+    });
+  };
+  if (getAllClients().size() <= kMostListed) {
+    for (const auto& client : getAllClients()) {
+      logClient(*client);
+    }
+    return;
+  }
+  std::size_t listed = 0;
+  for (const auto& [number, client] : index_->clients()) {
+    if (listed == kMostListed || texts.exhausted()) break;
+    logClient(*client);
+    ++listed;
+  }
+  kLog(LogLevel::Default, "sessions of %ld more clients are not listed", getAllClients().size() - listed);
 }
 
 std::shared_ptr<TarnReportingSession> TarnReportingService::findReportingSessionForID(std::int64_t reporterID) {
   const MutexLock lock(mutex_);
   if (reporterID == 0 || !isReportingEnabled()) return nullptr;
-  for (const auto& client : clients_) {
-    if (auto session = client->clientReportingSessionMap().find(reporterID)) {
-      kLog(LogLevel::Info, "found reporting session %lli for client %i", reporterID, client->processIdentifier());
-      return session;
-    }
+  auto session = lookUp(reporterID);
+  if (!session) {
+    kLog(LogLevel::Error, "failed to find reporting session %lli", reporterID);
   }
-  kLog(LogLevel::Error, "failed to find reporting session %lli", reporterID);
-  return nullptr;
+  return session;
+}
+
+std::shared_ptr<TarnReportingSession> TarnReportingService::lookUp(std::int64_t reporterID) const {
+  const auto* const client = index_->firstHolder(reporterID);
+  if (client == nullptr) return nullptr;
+  kLog(LogLevel::Info, "found reporting session %lli for client %i", reporterID, client->processIdentifier());
+  return client->clientReportingSessionMap().find(reporterID);
 }
 
 TarnReportingService::Sessions TarnReportingService::findReportingSessionsForIDs(
     const platform::ReporterIDs& reporterIDs) {
-  if (reporterIDs && !reporterIDs->empty()) {
-    Sessions found;
-    for (const std::int64_t reporterID : *reporterIDs) {
-      if (auto session = findReportingSessionForID(reporterID)) {
-        found.push_back(std::move(session));
-      }
+  SessionSearch search{reporterIDs, {}};
+  while (!findNextSessions(search)) {
+  }
+  return std::move(search.found);
+}
+
+bool TarnReportingService::findNextSessions(SessionSearch& search) {
+  if (!search.reporterIDs || search.reporterIDs->empty()) {
+    search.found = getAllActiveReportingSessions();
+    logReportingSessions();
+    if (search.found.empty()) {
+      search.found.push_back(retrieveSingleMessageSession());
     }
-    return found;
+    return true;
   }
-  Sessions active = getAllActiveReportingSessions();
-  logReportingSessions();
-  if (active.empty()) {
-    active.push_back(retrieveSingleMessageSession());
+  const std::vector<std::int64_t>& reporterIDs = *search.reporterIDs;
+  while (search.next < reporterIDs.size()) {
+    findListed(search, reporterIDs[search.next++]);
+    if (search.next % kLookUpsAtOnce == 0 && search.next < reporterIDs.size() &&
+        TarnReportingUtilityGetReportingServerQueue()->spend(1)) {
+      return false;
+    }
   }
-  return active;
+  if (search.unknown > kMostUnknownListed) {
+    kLog(LogLevel::Error, "failed to find %ld more reporting sessions", search.unknown - kMostUnknownListed);
+  }
+  return true;
+}
+
+void TarnReportingService::findListed(SessionSearch& search, std::int64_t reporterID) {
+  const MutexLock lock(mutex_);
+  if (reporterID == 0 || !isReportingEnabled()) return;
+  if (auto session = lookUp(reporterID)) {
+    search.found.push_back(std::move(session));
+  } else if (++search.unknown <= kMostUnknownListed) {
+    kLog(LogLevel::Error, "failed to find reporting session %lli", reporterID);
+  }
 }
 
 void TarnReportingService::removeClient(const TarnReportingClientServerInstance& client) {
@@ -200,17 +271,21 @@ void TarnReportingService::endSingleMessageSession() {
 }
 
 void TarnReportingService::logReportingSessions() {
-  const Sessions active = getAllActiveReportingSessions();
-  kLog(LogLevel::Default, "%ld active reporting session(s) %@", active.size(), [&] { return descriptions(active); });
+  TarnReportingRequireServerQueue();
+  logSessionsOfClients();
+  kLog(LogLevel::Default, "%ld active reporting session(s) %@", index_->runningCount(), [this] {
+    return SessionTexts().of(index_->runningCount(), [this](auto visit) {
+      const auto& clients = index_->clients();
+      static_cast<void>(std::all_of(clients.begin(), clients.end(), [&](const auto& entry) {
+        return entry.second->clientReportingSessionMap().forEachRunning(visit);
+      }));
+    });
+  });
 }
 
 std::size_t TarnReportingService::sessionCount() const {
   const MutexLock lock(mutex_);
-  std::size_t count = singleMessageSession_ ? 1 : 0;
-  for (const auto& client : clients_) {
-    count += client->clientReportingSessionMap().size();
-  }
-  return count;
+  return index_->sessionCount() + (singleMessageSession_ ? 1 : 0);
 }
 
 std::shared_ptr<TarnReportingSession> TarnReportingService::retrieveSingleMessageSession() {

@@ -14,6 +14,7 @@
 #include "platform/Listener.h"
 #include "plist/ThreadSafety.h"
 #include "service/TarnReportingServiceDelegateProtocol.h"
+#include "service/TarnReportingSessionIndex.h"
 
 namespace tarn {
 
@@ -44,6 +45,7 @@ class TarnReportingService : public TarnReportingServiceDelegateProtocol,
   // A list with IDs: every session found for them, 0 skipped. No list or an empty one: every running session of
   // every client; when none runs, the single-message session, made and started when there is none.
   Sessions findReportingSessionsForIDs(const platform::ReporterIDs& reporterIDs) override;
+  bool findNextSessions(SessionSearch& search) override;
   void removeClient(const TarnReportingClientServerInstance& client) override;
   void logReportingSessions() override;
   TarnReportingClientEnd clientEnd() const override { return clientEnd_; }
@@ -53,13 +55,20 @@ class TarnReportingService : public TarnReportingServiceDelegateProtocol,
   // Stops the single-message session, for which no client speaks. Called once the clients are gone, on the server
   // queue; nothing comes in any more then.
   void endSingleMessageSession();
+  const TarnReportingSessionIndex& sessionIndex() const override { return *index_; }
+  void countMessage(TarnReportingOutcome outcome) override { messageCounts_.add(outcome); }
 
   // Sessions that exist now, the single-message session included.
   std::size_t sessionCount() const;
+  // What became of the messages so far. Threads: the server queue.
+  const TarnReportingMessageCounts& messageCounts() const noexcept { return messageCounts_; }
 
  private:
   TarnReportingService();
   void handleInvalidation(const std::weak_ptr<TarnReportingClientServerInstance>& weakClient);
+  std::shared_ptr<TarnReportingSession> lookUp(std::int64_t reporterID) const;
+  void findListed(SessionSearch& search, std::int64_t reporterID);
+  void logSessionsOfClients() const;
   std::shared_ptr<TarnReportingSession> retrieveSingleMessageSession();
   void queueStopSingleSession(std::chrono::nanoseconds delay);
   void checkSingleSession();
@@ -68,8 +77,11 @@ class TarnReportingService : public TarnReportingServiceDelegateProtocol,
 
   mutable RecursiveMutex mutex_;
   Clients clients_ TARN_GUARDED_BY(mutex_);  // changed on the server queue alone
+  const std::shared_ptr<TarnReportingSessionIndex> index_;
 
   // Server queue only.
+  std::uint64_t nextClientNumber_ = 0;
+  TarnReportingMessageCounts messageCounts_;
   TarnReportingClientEnd clientEnd_ = TarnReportingClientEnd::ClientGone;
   std::shared_ptr<TarnReportingSession> singleMessageSession_;
   std::chrono::nanoseconds singleMessageSessionLastRetrieved_{};  // on the monotonic clock

@@ -3,17 +3,20 @@
 // Threads: the server queue; the look-ups by ID and removeClient take the service's lock as well.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <memory>
 #include <string_view>
 #include <vector>
 
 #include "platform/TarnReportingServiceProtocol.h"
+#include "service/TarnReportingMessageCounts.h"
 
 namespace tarn {
 
 class TarnReportingClientServerInstance;
 class TarnReportingSession;
+class TarnReportingSessionIndex;
 
 // Why a client ends, and its sessions with it.
 enum class TarnReportingClientEnd : std::uint8_t {
@@ -27,6 +30,14 @@ class TarnReportingServiceDelegateProtocol {
   using Clients = std::vector<std::shared_ptr<TarnReportingClientServerInstance>>;
   using Sessions = std::vector<std::shared_ptr<TarnReportingSession>>;
 
+  // A look-up of a list of IDs that is done in parts.
+  struct SessionSearch {
+    platform::ReporterIDs reporterIDs;
+    Sessions found;
+    std::size_t next = 0;     // of the IDs
+    std::size_t unknown = 0;  // IDs under which there is no session
+  };
+
   virtual ~TarnReportingServiceDelegateProtocol() = default;
   // The connected clients in the order of connection.
   virtual const Clients& getAllClients() const = 0;
@@ -37,10 +48,16 @@ class TarnReportingServiceDelegateProtocol {
   virtual std::shared_ptr<TarnReportingSession> findReportingSessionForID(std::int64_t reporterID) = 0;
   // The sessions that a message with this list of IDs goes to; see TarnReportingService.
   virtual Sessions findReportingSessionsForIDs(const platform::ReporterIDs& reporterIDs) = 0;
+  // Goes on with such a look-up until it is done or others are to have their turn; whether it is done.
+  virtual bool findNextSessions(SessionSearch& search) = 0;
   virtual void removeClient(const TarnReportingClientServerInstance& client) = 0;
   virtual void logReportingSessions() = 0;
   // Why a client that ends now does.
   virtual TarnReportingClientEnd clientEnd() const = 0;
+  // Of all clients' sessions.
+  virtual const TarnReportingSessionIndex& sessionIndex() const = 0;
+  // Tells what became of a message.
+  virtual void countMessage(TarnReportingOutcome outcome) = 0;
 };
 
 }  // namespace tarn

@@ -46,6 +46,18 @@ std::shared_ptr<TarnReportingService> makeService(platform::Log& log) {
   return service;
 }
 
+ServiceCounts countsOf(const TarnReportingService& service) {
+  const TarnReportingMessageCounts& messages = service.messageCounts();
+  ServiceCounts counts(service.sessionCount());
+  counts.delivered = messages.of(TarnReportingOutcome::Delivered);
+  counts.redundant = messages.of(TarnReportingOutcome::Redundant);
+  counts.unwanted = messages.of(TarnReportingOutcome::Unwanted);
+  counts.undeliverable = messages.of(TarnReportingOutcome::Undeliverable);
+  counts.withoutSession = messages.of(TarnReportingOutcome::WithoutSession);
+  counts.refused = messages.of(TarnReportingOutcome::Refused);
+  return counts;
+}
+
 // Serves until a signal; the exit status.
 int serve(LinuxPlatform& platform, HostSetup& setup) {
   MainLoop& loop = platform.loop();
@@ -60,8 +72,7 @@ int serve(LinuxPlatform& platform, HostSetup& setup) {
   TarnReportingInstallFacilities(&platform.facilities());
   service = makeService(*setup.log);
   // Only now is there anything to connect to: who can reach the service finds it whole, its notifications heard.
-  const Status listening =
-      platform.listen(std::move(setup.socket), service, [&service] { return service->sessionCount(); });
+  const Status listening = platform.listen(std::move(setup.socket), service, [&service] { return countsOf(*service); });
   if (listening.failed()) return refuse(listening->text);
   platform.serve();
   return kExitSuccess;

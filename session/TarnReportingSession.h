@@ -55,8 +55,8 @@ class TarnReportingSession : public std::enable_shared_from_this<TarnReportingSe
   void start();
   void stop();
   // Takes a message in: stamps, cleans and tags it, tests it for redundancy, logs it and hands it to the workers; then
-  // calls the reply, if there is one.
-  void sendMessage(const MessagePointer& message, platform::Reply<> reply = nullptr);
+  // calls the reply, if there is one. How many workers got it.
+  std::size_t sendMessage(const MessagePointer& message, platform::Reply<> reply = nullptr);
 
   // The steps of the intake; each changes the record's payload in place.
   static void addMissingDates(TarnReportingSessionMessage& message);

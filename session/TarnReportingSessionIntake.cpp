@@ -36,7 +36,7 @@ std::string withoutBlanks(std::string_view key) {
 
 }  // namespace
 
-void TarnReportingSession::sendMessage(const MessagePointer& message, platform::Reply<> reply) {
+std::size_t TarnReportingSession::sendMessage(const MessagePointer& message, platform::Reply<> reply) {
   assert(TarnReportingIsOnServerQueue());
   const TarnReportingSignpost signpost(SignpostCategory::Message, kModule, "sendMessage", {"reporterID", reporterID_});
   ++totalMessageCount_;
@@ -55,10 +55,11 @@ void TarnReportingSession::sendMessage(const MessagePointer& message, platform::
   if (!message->isRedundant()) {
     log_.append(message);
   }
-  workers_.deliver(message, reporterID_);
+  const std::size_t workers = workers_.deliver(message, reporterID_);
   if (reply) {
     reply(std::nullopt);
   }
+  return workers;
 }
 
 void TarnReportingSession::addMissingDates(TarnReportingSessionMessage& message) {

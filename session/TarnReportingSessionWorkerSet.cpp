@@ -125,8 +125,9 @@ void TarnReportingSessionWorkerSet::stopWorkers(std::int64_t reporterID) {
   });
 }
 
-void TarnReportingSessionWorkerSet::deliver(const std::shared_ptr<TarnReportingSessionMessage>& message,
-                                            std::int64_t reporterID) const {
+std::size_t TarnReportingSessionWorkerSet::deliver(const std::shared_ptr<TarnReportingSessionMessage>& message,
+                                                   std::int64_t reporterID) const {
+  std::size_t count = 0;
   for (const Member& member : messageWorkers_) {
     if (wants(member, *message)) {
       {
@@ -135,8 +136,10 @@ void TarnReportingSessionWorkerSet::deliver(const std::shared_ptr<TarnReportingS
       }
       kLog(LogLevel::Debug, "TarnReportingSessionWorker action=handleMessage worker=%@ reporterID=%lli",
            member.workerClass->name, reporterID);
+      ++count;
     }
   }
+  return count;
 }
 
 }  // namespace tarn

@@ -34,8 +34,8 @@ class TarnReportingSessionWorkerSet {
                                const std::shared_ptr<TarnReportingSession>& session);
   // Stops every worker that runs: producers first, so that what they derive still reaches running consumers.
   void stopWorkers(std::int64_t reporterID);
-  // Hands the message to each running consumer that wants it, in order.
-  void deliver(const std::shared_ptr<TarnReportingSessionMessage>& message, std::int64_t reporterID) const;
+  // Hands the message to each running consumer that wants it, in order; how many did.
+  std::size_t deliver(const std::shared_ptr<TarnReportingSessionMessage>& message, std::int64_t reporterID) const;
 
   // Every worker, in the order of creation.
   const std::vector<Member>& messageWorkers() const noexcept { return messageWorkers_; }

@@ -216,6 +216,16 @@ void ManualWorkQueue::help(std::chrono::nanoseconds) {
   }
 }
 
+bool ManualWorkQueue::spend(std::size_t cost) {
+  spent_ += cost;
+  return turn_ != 0 && spent_ >= turn_;
+}
+
+void ManualWorkQueue::asyncNext(platform::Work rest) {
+  spent_ = 0;
+  async(std::move(rest));
+}
+
 bool ManualWorkQueue::runOne() {
   return schedule_->runOne(identifier_);
 }

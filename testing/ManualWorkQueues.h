@@ -41,8 +41,13 @@ class ManualWorkQueue final : public platform::SuspendableQueue {
   void suspend(std::chrono::nanoseconds longest, platform::Work next) override;
   void resume() override;
   void help(std::chrono::nanoseconds longest) override;
+  bool spend(std::size_t cost) override;
+  void asyncNext(platform::Work rest) override;
 
   // Controls.
+  // From now on a piece of work that spent so much is told to give way; what is left of it then runs after all that
+  // waits. Without it no work gives way.
+  void setTurn(std::size_t cost) noexcept { turn_ = cost; }
   // Runs the oldest piece of due work of this queue; whether there was one.
   bool runOne();
   // Runs due work of this queue until there is none; how many pieces ran.
@@ -59,6 +64,8 @@ class ManualWorkQueue final : public platform::SuspendableQueue {
   const std::size_t identifier_;
   const std::string name_;
   const platform::QualityOfService quality_;
+  std::size_t turn_ = 0;
+  std::size_t spent_ = 0;  // since work of it last gave way
 };
 
 class ManualWorkQueues final : public platform::WorkQueues {

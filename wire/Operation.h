@@ -29,6 +29,7 @@ enum class Operation : std::uint8_t {
   GetAllReporters,
   KillService,
   Status = 100,
+  Settle,
 };
 
 // What follows the operation in a request. Names, kinds and places stand in kArguments (Request.h).
@@ -97,6 +98,7 @@ inline constexpr std::array kOperations = {
     OperationRow{Operation::GetAllReporters, "getAllReporters", {}, Result::Numbers},
     OperationRow{Operation::KillService, "killService", {}, Result::NoReply},
     OperationRow{Operation::Status, "status", {}, Result::Dictionary, ServedBy::Host},
+    OperationRow{Operation::Settle, "settle", {}, Result::Nothing, ServedBy::Host},
 };
 
 // The numbers from here up are the host's own.
@@ -132,7 +134,7 @@ constexpr std::optional<Operation> operationFromNumber(std::uint64_t number) noe
   return known ? std::optional(kOperations[index].operation) : std::nullopt;
 }
 
-// "createReportingSession", ..., "killService", "status". The text is static.
+// "createReportingSession", ..., "killService", "status", "settle". The text is static.
 constexpr std::string_view operationName(Operation operation) noexcept {
   return rowOf(operation).name;
 }
@@ -151,10 +153,14 @@ enum class ErrorCode : std::uint8_t {
   UnknownOperation = 1,
   BadArguments = 2,     // wrong count, or a wrong kind or range in an argument's place
   NotPropertyList = 3,  // something inside a dictionary argument that a property list can't hold
+  OverQuota = 4,        // the client or its user has as much as it may have
 };
+inline constexpr std::size_t kErrorCodes = 4;
 
 // Containers inside each other, a dictionary argument being the first.
 inline constexpr std::size_t kMaxNesting = 64;
+// Entries of a list of reporter IDs.
+inline constexpr std::size_t kMaxReporterIDs = 65536;
 // Bytes of the length that stands before each frame (little-endian).
 inline constexpr std::size_t kFrameHeaderBytes = 4;
 // The largest frame, its length not counted, unless configured otherwise.

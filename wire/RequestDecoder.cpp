@@ -164,9 +164,13 @@ bool RequestPass::read(ReporterIDs& reporterIDs, const char* expected) {
   if (!in_.readHead(head)) return false;
   if (head.major == Major::Simple && head.info == 22) return true;
   if (head.major != Major::Array || (!head.open() && head.argument > in_.left())) return badArgument(expected);
+  constexpr const char* kTooMany = "reporter IDs: at most 65536 expected";
+  static_assert(kMaxReporterIDs == 65536);
+  if (head.argument > kMaxReporterIDs) return badArgument(kTooMany);
   std::vector<std::int64_t>& ids = reporterIDs.emplace();
   ids.reserve(static_cast<std::size_t>(head.argument));
   while (head.open() ? !in_.atBreak() : ids.size() < head.argument) {
+    if (ids.size() == kMaxReporterIDs) return badArgument(kTooMany);
     std::int64_t id = 0;
     if (!read(id, expected)) return false;
     ids.push_back(id);

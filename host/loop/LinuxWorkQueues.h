@@ -39,6 +39,7 @@ class LinuxWorkQueues final : public platform::WorkQueues {
   void setRoomHandler(WorkerPool::RoomHandler handler) { pool_->setRoomHandler(std::move(handler)); }
   bool isFull() const noexcept { return pool_->isFull(); }
   std::size_t unfinished() const { return pool_->unfinished(); }
+  void afterWhatIsUnfinished(platform::Work done) { pool_->afterWhatIsUnfinished(std::move(done)); }
   [[nodiscard]] bool settle(std::chrono::nanoseconds longest) { return pool_->settle(longest); }
 
  private:

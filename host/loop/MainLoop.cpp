@@ -103,6 +103,7 @@ void MainLoop::waitForEvents() {
 
 void MainLoop::waitUntil(std::chrono::nanoseconds deadline, platform::UniqueFunction<bool()> isOver) {
   if (std::exchange(waits_, true)) return;
+  const WorkLane::Scope nobodys(nullptr);  // what comes meanwhile isn't the work of whoever waits
   while (!isOver() && !stopping_.load(std::memory_order_relaxed)) {
     flushAll();
     const auto left = deadline - clock_.monotonic();

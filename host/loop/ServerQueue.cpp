@@ -20,6 +20,10 @@ ServerQueue::ServerQueue(const platform::Clock& clock, QueueProgress& progress)
     : clock_(clock), progress_(progress), wake_(::eventfd(0, EFD_CLOEXEC | EFD_NONBLOCK)) {}
 
 void ServerQueue::async(platform::Work work) {
+  if (WorkLane* const lane = WorkLane::currentOf(this)) {
+    asyncIn(*lane, std::move(work));
+    return;
+  }
   bool wakeServer = false;
   {
     const MutexLock lock(mutex_);
@@ -55,7 +59,8 @@ bool ServerQueue::isCurrent() const noexcept {
 
 std::size_t ServerQueue::waiting() const noexcept {
   const MutexLock lock(mutex_);
-  return ready() + (delayed_.empty() ? 0 : delayed_.dueCount(clock_.monotonic()));
+  return ready() + inLanes_.load(std::memory_order_relaxed) +
+         (delayed_.empty() ? 0 : delayed_.dueCount(clock_.monotonic()));
 }
 
 void ServerQueue::wake() {
@@ -82,6 +87,43 @@ std::size_t ServerQueue::run(std::size_t limit) {
     ++count;
   }
   return count;
+}
+
+void ServerQueue::asyncIn(WorkLane& lane, platform::Work work) {
+  lane.add(std::move(work));
+  inLanes_.store(inLanes_.load(std::memory_order_relaxed) + 1, std::memory_order_relaxed);
+}
+
+void ServerQueue::asyncNext(platform::Work rest) {
+  WorkLane* const lane = WorkLane::currentOf(this);
+  if (lane == nullptr) {
+    async(std::move(rest));
+    return;
+  }
+  lane->addNext(std::move(rest));
+  inLanes_.store(inLanes_.load(std::memory_order_relaxed) + 1, std::memory_order_relaxed);
+}
+
+// Work of the queue's own list has no turn that could end.
+bool ServerQueue::spend(std::size_t cost) {
+  WorkLane* const lane = WorkLane::currentOf(this);
+  if (lane == nullptr) return false;
+  lane->spend(cost);
+  if (shouldPause_ && shouldPause_()) {
+    lane->endTurn();
+  }
+  return !lane->hasTurn();
+}
+
+void ServerQueue::runLane(WorkLane& lane) {
+  const CurrentQueue current(this);
+  const WorkLane::Scope scope(&lane);
+  while (!lane.empty() && lane.hasTurn()) {
+    platform::Work work = lane.take();
+    inLanes_.store(inLanes_.load(std::memory_order_relaxed) - 1, std::memory_order_relaxed);
+    progress_.step();
+    work();
+  }
 }
 
 bool ServerQueue::refill() {

@@ -8,6 +8,7 @@
 //
 //   async -> [ready, under the lock] -> [batch, serving thread only] -> run
 //   asyncAfter -> [delayed, by deadline and sequence] -> ready, once its moment has come
+//   async for a client -> [its WorkLane] -> runLane, when it is the client's turn
 //
 // Shared by whoever hands work over. Threads: the WorkQueue operations any; the serving operations one thread, always
 // the same.
@@ -21,6 +22,7 @@
 #include "host/log/LogClient.h"
 #include "host/loop/DelayedWork.h"
 #include "host/loop/QueueProgress.h"
+#include "host/loop/WorkLane.h"
 #include "host/system/UniqueDescriptor.h"
 #include "platform/Clock.h"
 #include "platform/WorkQueue.h"
@@ -39,7 +41,9 @@ class ServerQueue final : public platform::WorkQueue {
   void asyncAfter(std::chrono::nanoseconds delay, platform::Work work) override;
   bool isCurrent() const noexcept override;
   std::size_t waiting() const noexcept override;
-  // Like waiting() but without the delayed pieces that are due and were not looked at yet: one load.
+  bool spend(std::size_t cost) override;
+  void asyncNext(platform::Work rest) override;
+  // Like waiting() but without the lanes and the delayed pieces that are due and were not looked at yet: one load.
   std::size_t ready() const noexcept { return ready_.load(std::memory_order_relaxed); }
 
   // Makes the server go through one more turn before it sleeps, although no work came. Threads: any.
@@ -47,6 +51,11 @@ class ServerQueue final : public platform::WorkQueue {
 
   // Serving. Runs waiting work, at most `limit` pieces; how many it ran.
   std::size_t run(std::size_t limit);
+  // Hands `work` over for the client of this lane. Runs the lane's work until there is none or its turn is over.
+  void asyncIn(WorkLane& lane, platform::Work work);
+  void runLane(WorkLane& lane);
+  // Asked where long work could give way: true ends the turn early, because what it makes can't be taken in now.
+  void setPauseSource(platform::UniqueFunction<bool()> shouldPause) { shouldPause_ = std::move(shouldPause); }
   // Announces that the server will sleep: how long it may (nothing: for ever). From then on new work wakes it, until
   // awake() is called. Zero when there is work: then nothing was announced.
   std::optional<std::chrono::nanoseconds> prepareToSleep();
@@ -75,10 +84,12 @@ class ServerQueue final : public platform::WorkQueue {
   UniqueDescriptor wake_;
 
   std::atomic<std::size_t> ready_{0};
+  std::atomic<std::size_t> inLanes_{0};  // written by the serving thread only
 
   // Serving thread only.
   std::vector<Piece> batch_;
   std::size_t next_ = 0;
+  platform::UniqueFunction<bool()> shouldPause_;
 
   mutable Mutex mutex_;
   std::vector<Piece> incoming_ TARN_GUARDED_BY(mutex_);

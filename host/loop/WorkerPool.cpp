@@ -4,6 +4,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <iterator>
+#include <set>
 #include <system_error>
 
 #include "host/loop/CurrentQueue.h"
@@ -131,6 +132,35 @@ void WorkerPool::help(const std::shared_ptr<Line>& line, nanoseconds longest) {
     runnable_.erase(place);
     runSome(line);
   }
+}
+
+// A line with unfinished work stands in the pool's line, is run or is suspended. Each gets a piece behind what it has.
+void WorkerPool::afterWhatIsUnfinished(platform::Work done) {
+  struct Barrier {
+    std::atomic<std::size_t> left;
+    platform::Work done;
+    void pass() {
+      if (left.fetch_sub(1) == 1) {
+        done();
+      }
+    }
+  };
+  const auto barrier = std::make_shared<Barrier>();
+  barrier->done = std::move(done);
+  barrier->left = 1;
+  {
+    const MutexLock lock(mutex_);
+    std::set<std::shared_ptr<Line>> busy(runnable_.begin(), runnable_.end());
+    busy.insert(running_.begin(), running_.end());
+    for (const auto& [moment, line] : suspensions_) {
+      busy.insert(line);
+    }
+    barrier->left += busy.size();
+    for (const std::shared_ptr<Line>& line : busy) {
+      enqueue(line, [barrier] { barrier->pass(); });
+    }
+  }
+  barrier->pass();
 }
 
 std::size_t WorkerPool::unfinished() const {
@@ -263,6 +293,7 @@ void WorkerPool::sleep() {
 
 void WorkerPool::runSome(const std::shared_ptr<Line>& line) {
   line->running = true;
+  running_.push_back(line);
   platform::Work next = std::move(line->next);
   if (line->position == line->taken.size()) {
     line->taken.clear();
@@ -273,6 +304,7 @@ void WorkerPool::runSome(const std::shared_ptr<Line>& line) {
   const std::size_t finished = runTurn(*line, std::move(next));
   mutex_.lock();
   line->running = false;
+  running_.erase(std::find(running_.begin(), running_.end(), line));
   if (helpers_ > 0) {
     turnEnded_.notifyAll();
   }

@@ -74,6 +74,9 @@ class WorkerPool {
   // Pieces handed over and not yet finished, of all queues; what is suspended counts, what is delayed does not.
   std::size_t unfinished() const;
   bool isFull() const noexcept { return full_.load(std::memory_order_relaxed); }
+  // Calls `done` once all that is unfinished now is finished, on a thread of the pool or at once on the caller's. It is
+  // destroyed uncalled with work that is.
+  void afterWhatIsUnfinished(platform::Work done);
   // Waits until nothing is unfinished; false when `longest` passed first.
   [[nodiscard]] bool settle(std::chrono::nanoseconds longest);
 
@@ -109,6 +112,7 @@ class WorkerPool {
   ConditionVariable turnEnded_;  // for those who help
   std::size_t helpers_ TARN_GUARDED_BY(mutex_) = 0;
   std::deque<std::shared_ptr<Line>> runnable_ TARN_GUARDED_BY(mutex_);
+  std::vector<std::shared_ptr<Line>> running_ TARN_GUARDED_BY(mutex_);
   DelayedWork<Delayed> delayed_ TARN_GUARDED_BY(mutex_);
   Suspensions suspensions_ TARN_GUARDED_BY(mutex_);
   std::uint64_t nextSuspension_ TARN_GUARDED_BY(mutex_) = 0;

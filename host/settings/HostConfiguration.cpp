@@ -94,11 +94,20 @@ Status takeWithin(const toml::node& node, Number& setting) {
   return taken;
 }
 
-Status takeDelay(const toml::node& node, std::chrono::milliseconds& setting) {
+template <std::int64_t kLowest, std::int64_t kHighest>
+Status takeMilliseconds(const toml::node& node, std::chrono::milliseconds& setting) {
   std::int64_t number = setting.count();
-  Status taken = takeWhole(node, 0, 3'600'000, number);
+  Status taken = takeWhole(node, kLowest, kHighest, number);
   setting = std::chrono::milliseconds(number);
   return taken;
+}
+
+Status takeDelay(const toml::node& node, std::chrono::milliseconds& setting) {
+  return takeMilliseconds<0, 3'600'000>(node, setting);
+}
+
+Status takeRate(const toml::node& node, std::size_t& setting) {
+  return takeWithin<0, 1'000'000'000>(node, setting);
 }
 
 struct Setting {
@@ -109,7 +118,7 @@ struct Setting {
 
 using Node = const toml::node&;
 using Host = HostConfiguration&;
-constexpr std::array<Setting, 14> kSettings{{
+constexpr std::array<Setting, 22> kSettings{{
     {"tally", "in_use", [](Node node, Host host) { return take(node, host.tally.inUse); }},
     {"rtc", "backends", [](Node node, Host host) { return take(node, host.rtc.backends); }},
     {"rtc", "no_backends", [](Node node, Host host) { return take(node, host.rtc.noBackends); }},
@@ -128,6 +137,22 @@ constexpr std::array<Setting, 14> kSettings{{
      [](Node node, Host host) { return takeWithin<1, 36500>(node, host.recorder.maxAgeDays); }},
     {"limits", "max_frame_bytes",
      [](Node node, Host host) { return takeWithin<64, 67108864>(node, host.limits.maxFrameBytes); }},
+    {"limits", "half_frame_ms",
+     [](Node node, Host host) { return takeMilliseconds<100, 3'600'000>(node, host.limits.halfFrameTime); }},
+    {"limits", "connections_per_user",
+     [](Node node, Host host) { return takeWithin<1, 65536>(node, host.limits.quotas.connectionsPerUser); }},
+    {"limits", "sessions_per_connection",
+     [](Node node, Host host) { return takeWithin<1, 16777216>(node, host.limits.quotas.sessionsPerConnection); }},
+    {"limits", "sessions_per_user",
+     [](Node node, Host host) { return takeWithin<1, 16777216>(node, host.limits.quotas.sessionsPerUser); }},
+    {"limits", "waiting_bytes_per_user",
+     [](Node node, Host host) { return takeWithin<65536, 1073741824>(node, host.limits.quotas.waitingBytesPerUser); }},
+    {"limits", "waiting_bytes",
+     [](Node node, Host host) { return takeWithin<65536, 1073741824>(node, host.limits.quotas.waitingBytes); }},
+    {"limits", "messages_per_second_per_connection",
+     [](Node node, Host host) { return takeRate(node, host.limits.quotas.messagesPerSecondPerConnection); }},
+    {"limits", "messages_per_second_per_user",
+     [](Node node, Host host) { return takeRate(node, host.limits.quotas.messagesPerSecondPerUser); }},
 }};
 
 bool isSection(std::string_view name) {

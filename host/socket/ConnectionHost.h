@@ -5,11 +5,15 @@
 #pragma once
 
 #include <unordered_set>
+#include <utility>
 
 #include "host/loop/MainLoop.h"
 #include "host/socket/ConnectionGate.h"
+#include "host/socket/FairShares.h"
+#include "host/socket/HalfFrames.h"
 #include "host/socket/HostLimits.h"
 #include "host/socket/Ledger.h"
+#include "host/socket/Quotas.h"
 #include "platform/Log.h"
 #include "platform/UniqueFunction.h"
 #include "wire/RequestDecoder.h"
@@ -27,11 +31,17 @@ class OpenConnection {
 class ConnectionHost {
  public:
   using StatusSource = platform::UniqueFunction<plist::Dictionary()>;
+  using SettleSource = platform::UniqueFunction<void(platform::Work done)>;
 
   // Loop and log outlive the host, and the loop runs no more when the host ends.
   ConnectionHost(MainLoop& mainLoop, platform::Log& logSink, const HostLimits& hostLimits = {})
-      : loop(mainLoop), log(logSink), limits(hostLimits), gate(mainLoop, hostLimits.maxQueuedWork) {
-    loop.addTurnHook([this] { gate.releaseHeld(); });
+      : loop(mainLoop),
+        log(logSink),
+        limits(hostLimits),
+        gate(mainLoop, hostLimits.maxQueuedWork),
+        halfFrames(hostLimits.halfFrameTime, hostLimits.quotas.waitingBytes) {
+    loop.queue()->setPauseSource([this] { return !gate.open(); });
+    loop.addTurnHook([this] { serveShares(); });
   }
   ConnectionHost(const ConnectionHost&) = delete;
   ConnectionHost& operator=(const ConnectionHost&) = delete;
@@ -50,6 +60,35 @@ class ConnectionHost {
     }
   }
 
+  // How `settle` finds out that what was handed over so far is committed; `done` is work of the server queue then, and
+  // is destroyed uncalled when it never will be. Without one there is nothing to commit.
+  void setSettleSource(SettleSource source) { settle_ = std::move(source); }
+  void settle(platform::Work done) {
+    if (settle_) {
+      settle_(std::move(done));
+    } else {
+      done();
+    }
+  }
+
+  // Looks after half frames as long as there are some.
+  void watchHalfFrames() {
+    if (halfFrames.overfull()) {
+      halfFrames.sweep(loop.clock().monotonic());
+    }
+    if (halfFrames.empty() || std::exchange(watchesHalfFrames_, true)) return;
+    const WorkLane::Scope nobodys(nullptr);
+    loop.queue()->asyncAfter(limits.halfFrameTime / kLooksAtHalfFrames, [this] {
+      watchesHalfFrames_ = false;
+      if (gate.open()) {
+        halfFrames.sweep(loop.clock().monotonic());
+      } else {
+        halfFrames.restart(loop.clock().monotonic());
+      }
+      watchHalfFrames();
+    });
+  }
+
   // Tells that the pause source's answer changed. Threads: any.
   void resumeRequests() { loop.queue()->wake(); }
 
@@ -58,14 +97,34 @@ class ConnectionHost {
   const HostLimits limits;
   Ledger ledger;
   ConnectionGate gate;
+  FairShares shares;
+  HalfFrames halfFrames;
   // One for all connections: it keeps nothing between frames but scratch space and the key lists seen lately.
   wire::RequestDecoder decoder;
   wire::DecodedRequest request;
   wire::Refusal refusal;
+  // Whether replies to a client that has more requests waiting may be gathered over some turns; not at the end.
+  bool gathersReplies = true;
 
  private:
+  // Cost of the requests that are served before the sockets are looked at again. A lone client need not give way.
+  static constexpr std::int64_t kCostPerTurn = 128;
+  static constexpr std::int64_t kCostPerTurnAlone = 512;
+  // Within the time that a half frame may take.
+  static constexpr int kLooksAtHalfFrames = 8;
+
+  void serveShares() {
+    const bool more =
+        shares.serve(ledger.connectionsOpen > 1 ? kCostPerTurn : kCostPerTurnAlone, [this] { return gate.open(); });
+    if (more) {
+      loop.queue()->wake();
+    }
+  }
+
   StatusSource status_;
   std::unordered_set<OpenConnection*> open_;
+  SettleSource settle_;
+  bool watchesHalfFrames_ = false;
 };
 
 }  // namespace tarn::linux_host

@@ -20,6 +20,24 @@ struct HostLimits {
   std::size_t maxQueuedWork = 4096;
   // Open connections; with more, the others wait in the listener's backlog until one ends.
   std::size_t maxConnections = 4096;
+  // What one connection and one user (a uid) may have. Who has it all is answered with an error that says so, and its
+  // connection goes on; the defaults are far beyond what honest clients need.
+  struct Quotas {
+    std::size_t connectionsPerUser = 2048;  // half of all, so that one user's leave room for the others'
+    std::size_t sessionsPerConnection = 65536;
+    std::size_t sessionsPerUser = 131072;
+    // Bytes of requests that were taken in and can't be served yet: half-sent frames, and what is held up.
+    std::size_t waitingBytesPerUser = std::size_t{32} << 20;
+    std::size_t waitingBytes = std::size_t{64} << 20;  // of all users
+    // 0: not bounded.
+    std::size_t messagesPerSecondPerConnection = 0;
+    std::size_t messagesPerSecondPerUser = 0;
+
+    bool operator==(const Quotas&) const = default;
+  };
+  Quotas quotas;
+  // How long a frame that was begun may wait for the rest; then its connection is cut off.
+  std::chrono::milliseconds halfFrameTime{30000};
   // Up to so many open connections keep their input buffers while they are quiet.
   std::size_t keptBuffers = 64;
   // Pieces of work of the workers' own queues; beyond the high mark connections stop likewise, until the low one.

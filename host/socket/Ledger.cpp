@@ -7,9 +7,10 @@ namespace tarn::linux_host {
 
 namespace {
 
-constexpr std::array<std::string_view, 3> kRefusalNames{"unknown_operation", "bad_arguments", "not_property_list"};
+constexpr std::array<std::string_view, wire::kErrorCodes> kRefusalNames{"unknown_operation", "bad_arguments",
+                                                                        "not_property_list", "over_quota"};
 constexpr std::array<std::string_view, kCutReasons> kCutNames{"unreadable_frame", "oversize_frame", "unread_replies",
-                                                              "half_frame", "reset"};
+                                                              "half_frame",       "stale_frame",    "reset"};
 
 plist::Dictionary byReason(std::span<const std::string_view> names, std::span<const std::uint64_t> counts) {
   plist::Dictionary dictionary;
@@ -21,19 +22,28 @@ plist::Dictionary byReason(std::span<const std::string_view> names, std::span<co
 
 }  // namespace
 
-plist::Dictionary Ledger::status(std::uint64_t sessions, std::uint64_t queued, const RecorderCounts& recorder) const {
+plist::Dictionary Ledger::status(const ServiceCounts& service, std::uint64_t queued,
+                                 const RecorderCounts& recorder) const {
   const auto refused = byReason(kRefusalNames, requestsRefused);
   const auto cut = byReason(kCutNames, connectionsCut);
   return {{"frames_received", framesReceived},
           {"messages_received", messagesReceived},
+          {"messages_delivered", service.delivered},
+          {"messages_redundant", service.redundant},
+          {"messages_unwanted", service.unwanted},
+          {"messages_undeliverable", service.undeliverable},
+          {"messages_without_session", service.withoutSession},
+          {"messages_refused", service.refused + messagesOverQuota},
+          {"messages_waiting", messagesReceived - messagesOverQuota - service.dealtWith()},
           {"replies_sent", repliesSent},
           {"replies_dropped", repliesDropped},
+          {"questions_dropped", questionsDropped},
           {"requests_refused", refused},
           {"connections_open", connectionsOpen},
           {"connections_total", connectionsTotal},
           {"connections_cut", cut},
           {"accept_pauses", acceptPauses},
-          {"sessions", sessions},
+          {"sessions", service.sessions},
           {"queued", queued},
           {"recorder_handed_over", recorder.handedOver},
           {"recorder_committed", recorder.committed},

@@ -125,7 +125,26 @@ static_assert(std::equal(kEntries.begin(), kEntries.end(), wire::kOperations.beg
                          [](const Entry& entry, const auto& row) { return entry.operation == row.operation; }),
               "one entry for each operation of the service, in the table's order");
 
+// A session is made, started and stopped with a worker of each class.
+constexpr std::size_t kSessionCost = 16;
+// Bytes that are decoded and stored in a unit of cost.
+constexpr std::size_t kBytesPerCost = 1024;
+
 }  // namespace
+
+std::size_t costOf(const wire::Request& request, std::size_t frameBytes) noexcept {
+  const std::size_t bytes = frameBytes / kBytesPerCost;
+  switch (request.operation) {
+    case Operation::CreateReportingSession:
+    case Operation::SetServiceType:
+    case Operation::StartReportingSessionForID:
+    case Operation::StopReportingSessionForID:
+    case Operation::DestroyReportingSession:
+      return kSessionCost + bytes;
+    default:
+      return 1 + bytes;
+  }
+}
 
 void dispatchRequest(wire::DecodedRequest& request, platform::TarnReportingServiceProtocol& service,
                      std::weak_ptr<ReplySink> sink) {

@@ -31,4 +31,13 @@ class ReplySink {
 void dispatchRequest(wire::DecodedRequest& request, platform::TarnReportingServiceProtocol& service,
                      std::weak_ptr<ReplySink> sink);
 
+// What serving the request costs at least, in units of about a microsecond; long work charges more as it goes on.
+std::size_t costOf(const wire::Request& request, std::size_t frameBytes) noexcept;
+
+// Whether a request changes nothing, so that it needn't be served when nobody is there to read the reply.
+constexpr bool onlyAsks(wire::Operation operation) noexcept {
+  const wire::Result result = wire::rowOf(operation).result;
+  return result == wire::Result::Number || result == wire::Result::Dictionary || result == wire::Result::Numbers;
+}
+
 }  // namespace tarn::linux_host

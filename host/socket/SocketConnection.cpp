@@ -8,6 +8,7 @@
 
 #include "host/log/LogFloodGuard.h"
 #include "host/log/PrefixedLog.h"
+#include "host/socket/Quotas.h"
 #include "wire/Encoder.h"
 
 namespace tarn::linux_host {
@@ -19,17 +20,33 @@ constexpr std::string_view kModule = "SocketConnection";
 constexpr std::size_t kEarlyFlushBytes = 262144;
 // Room for replies that a connection keeps while it is quiet.
 constexpr std::size_t kKeptOutputBytes = 65536;
+// While a client has more requests to be served, its replies are gathered up to so many bytes and for so many turns.
+constexpr std::size_t kGatheredReplyBytes = 4096;
+constexpr int kMostFlushesPutOff = 8;
+// Received bytes in a unit of cost.
+constexpr std::size_t kReceivedBytesPerCost = 8192;
+// Of an answer to `status`.
+constexpr std::size_t kStatusCost = 16;
+
+ucred peerOf(const UniqueDescriptor& socket) {
+  ucred peer{.pid = 0, .uid = static_cast<uid_t>(-1), .gid = static_cast<gid_t>(-1)};
+  socklen_t size = sizeof peer;
+  static_cast<void>(::getsockopt(socket.get(), SOL_SOCKET, SO_PEERCRED, &peer, &size));
+  return peer;
+}
 
 }  // namespace
 
 SocketConnection::SocketConnection(ConnectionHost& host, UniqueDescriptor socket, std::uint64_t number)
-    : host_(host), socket_(std::move(socket)), client_{.connection = number}, frames_(host.limits.maxFrameBytes) {
-  ucred peer{};
-  socklen_t size = sizeof peer;
-  if (::getsockopt(socket_.get(), SOL_SOCKET, SO_PEERCRED, &peer, &size) == 0) {
-    client_.process = peer.pid;
-    client_.user = peer.uid;
-  }
+    : ShareHolder(host.shares.partyOf(peerOf(socket).uid)),
+      host_(host),
+      socket_(std::move(socket)),
+      client_{.connection = number},
+      frames_(host.limits.maxFrameBytes),
+      lane_(host.loop.queue().get()) {
+  const ucred peer = peerOf(socket_);
+  client_.process = peer.pid;
+  client_.user = peer.uid;
   description_ = describe(client_);
 }
 
@@ -45,7 +62,13 @@ void SocketConnection::resume() {
   ++host_.ledger.connectionsOpen;
   ++host_.ledger.connectionsTotal;
   host_.add(*this);
+  ++party().connections;
   watch(EPOLLIN);
+}
+
+void SocketConnection::refuse(std::string why) {
+  refusal_ = std::move(why);
+  resume();
 }
 
 // Keeps the system's idea of what to wait for in step; asks it only when something changes.
@@ -68,10 +91,26 @@ void SocketConnection::handleEvents(std::uint32_t events) {
     flush();
   }
   if (state_ != State::Open || (events & (EPOLLIN | EPOLLHUP | EPOLLERR)) == 0) return;
-  if (!heldRequest_) {
-    receive();
-  } else if ((events & (EPOLLHUP | EPOLLERR)) != 0) {
-    // The peer is gone. That keeps until the request that it left behind could be served.
+  peerGone_ = peerGone_ || (events & EPOLLHUP) != 0;
+  if (host_.gate.open()) {
+    inputWaits_ = true;
+    host_.shares.ready(self());
+  } else {
+    stopAtHead(events);
+  }
+}
+
+void SocketConnection::stopAtHead(std::uint32_t events) {
+  inputWaits_ = true;
+  if (!heldRequest_ && lane_.empty()) {
+    bool received = false;
+    while (state_ == State::Open && !heldRequest_) {
+      if (!serveNextFrame() && (std::exchange(received, true) || !receive())) return;
+    }
+    return;
+  }
+  if ((events & (EPOLLHUP | EPOLLERR)) != 0) {
+    // The peer is gone. That keeps until the request that it left could be served.
     dropOutput();
     outputBroken_ = true;
     watch(0);
@@ -80,48 +119,121 @@ void SocketConnection::handleEvents(std::uint32_t events) {
   }
 }
 
-void SocketConnection::receive() {
+bool SocketConnection::receive() {
   const auto space = frames_.space();
   const auto size = std::min(space.size(), host_.limits.gulpBytes);
   const ssize_t bytes = ::recv(socket_.get(), space.data(), size, MSG_DONTWAIT);
   if (bytes > 0) {
+    inputWaits_ = static_cast<std::size_t>(bytes) == size;
     frames_.received(static_cast<std::size_t>(bytes));
-    serveFrames();
-  } else if (bytes == 0) {
+    lane_.spend(static_cast<std::size_t>(bytes) / kReceivedBytesPerCost);
+    return true;
+  }
+  inputWaits_ = false;
+  if (bytes == 0) {
     peerEnded(resetSeen_);
   } else if (errno != EAGAIN && errno != EINTR) {
     peerEnded(true);
   }
+  return false;
 }
 
-void SocketConnection::serveFrames() {
-  std::span<const std::byte> frame;
-  while (state_ == State::Open && !heldRequest_) {
-    switch (frames_.next(frame)) {
-      case wire::FrameBuffer::Next::Frame:
-        serveFrame(frame);
-        break;
-      case wire::FrameBuffer::Next::Incomplete:
-        if (frames_.pendingBytes() == 0 && host_.ledger.connectionsOpen > host_.limits.keptBuffers) {
-          frames_.release();
-        }
-        return;
-      case wire::FrameBuffer::Next::Oversize:
-        cut(CutReason::OversizeFrame, "frame of " + std::to_string(frames_.announcedBytes()) + " bytes, " +
-                                          std::to_string(host_.limits.maxFrameBytes) + " are allowed");
-        return;
-    }
+ShareHolder::Turn SocketConnection::takeTurn(std::int64_t credit) {
+  const LogClientScope scope(client_);
+  if (state_ == State::Open && (watchedEvents_ & EPOLLIN) == 0) {
+    watch(watchedEvents_ | EPOLLIN);
   }
+  lane_.beginTurn(credit);
+  bool more = true;
+  while (more && lane_.hasTurn()) {
+    more = serveNext();
+    if (heldRequest_) break;
+  }
+  countSessions();
+  if (!more) {
+    countWaitingBytes(state_ == State::Open ? frames_.pendingBytes() : 0);
+  }
+  return {lane_.spent(), more};
+}
+
+void SocketConnection::countSessions() {
+  const std::size_t sessions = object_ != nullptr ? object_->sessionCount() : 0;
+  party().sessions += sessions - std::exchange(countedSessions_, sessions);
+}
+
+// The request that is held, and input that waits for the rest of its frame: so much of it.
+void SocketConnection::countWaitingBytes(std::size_t half) {
+  if (half != 0 || halfFrame_) {
+    host_.halfFrames.note(halfFrame_, weak_from_this(), half, std::exchange(framesTaken_, false),
+                          host_.loop.clock().monotonic());
+  }
+  const std::size_t bytes = half + (heldRequest_ ? heldBytes_ : 0);
+  if (bytes != countedBytes_) {
+    party().waitingBytes += bytes - std::exchange(countedBytes_, bytes);
+  }
+  if (half != 0) {
+    host_.watchHalfFrames();
+  }
+}
+
+void SocketConnection::endHalfFrame(const std::string& why) {
+  cut(CutReason::StaleFrame, why);
+}
+
+void SocketConnection::finishWork() {
+  const LogClientScope scope(client_);
+  while (!lane_.empty()) {
+    lane_.beginTurn(FairShares::kQuantum);
+    host_.loop.queue()->runLane(lane_);
+  }
+}
+
+bool SocketConnection::serveNext() {
+  if (!lane_.empty()) {
+    host_.loop.queue()->runLane(lane_);
+    return true;
+  }
+  if (state_ != State::Open) return false;
+  if (heldRequest_) {
+    host_.gate.countReleased();
+    wire::DecodedRequest request = std::move(*heldRequest_);
+    heldRequest_.reset();
+    countWaitingBytes(0);
+    serveRequest(request, heldBytes_);
+    return true;
+  }
+  return serveNextFrame() || (inputWaits_ && state_ == State::Open && receive());
+}
+
+bool SocketConnection::serveNextFrame() {
+  std::span<const std::byte> frame;
+  switch (frames_.next(frame)) {
+    case wire::FrameBuffer::Next::Frame:
+      serveFrame(frame);
+      return true;
+    case wire::FrameBuffer::Next::Incomplete:
+      if (!inputWaits_ && frames_.pendingBytes() == 0 && host_.ledger.connectionsOpen > host_.limits.keptBuffers) {
+        frames_.release();
+      }
+      return false;
+    case wire::FrameBuffer::Next::Oversize:
+      cut(CutReason::OversizeFrame, "frame of " + std::to_string(frames_.announcedBytes()) + " bytes, " +
+                                        std::to_string(host_.limits.maxFrameBytes) + " are allowed");
+      return true;
+  }
+  return false;
 }
 
 void SocketConnection::serveFrame(std::span<const std::byte> frame) {
   ++host_.ledger.framesReceived;
+  framesTaken_ = true;
   wire::DecodedRequest& request = host_.request;
   switch (host_.decoder.decode(frame, request, host_.refusal)) {
     case wire::DecodeVerdict::Ok:
-      serveRequest(request);
+      serveRequest(request, frame.size());
       break;
     case wire::DecodeVerdict::Refused:
+      lane_.spend(costOf(request, frame.size()));
       host_.ledger.countRefusal(host_.refusal.code);
       sendError(request.id, {wire::kErrorDomain, static_cast<std::int64_t>(host_.refusal.code), host_.refusal.text});
       break;
@@ -131,31 +243,91 @@ void SocketConnection::serveFrame(std::span<const std::byte> frame) {
   }
 }
 
-void SocketConnection::serveRequest(wire::DecodedRequest& request) {
+void SocketConnection::serveRequest(wire::DecodedRequest& request, std::size_t frameBytes) {
+  if (peerGone_ && onlyAsks(request.operation)) {
+    lane_.spend(1);
+    ++host_.ledger.questionsDropped;
+    return;
+  }
   if (request.operation == wire::Operation::Status) {
     // At once: whoever asks how the service is must not wait for its work.
+    lane_.spend(kStatusCost);
     sendReply(request.id, {host_.status()});
-  } else if (!host_.gate.open()) {
-    heldRequest_ = std::move(request);
-    host_.gate.hold(shared_from_this());
+    return;
+  }
+  if (!refusal_.empty()) {
+    refuseRequest(request.id, refusal_);
+    return;
+  }
+  if (!host_.gate.open()) {
+    hold(request, frameBytes);
+    return;
+  }
+  lane_.spend(costOf(request, frameBytes));
+  if (request.operation == wire::Operation::SendMessage) {
+    ++host_.ledger.messagesReceived;
+  }
+  if (const std::string why = quotaRefusal(request); !why.empty()) [[unlikely]] {
+    host_.ledger.messagesOverQuota += request.operation == wire::Operation::SendMessage ? 1 : 0;
+    refuseRequest(request.id, why);
+  } else if (request.operation == wire::Operation::Settle) {
+    settle(request.id);
   } else {
-    if (request.operation == wire::Operation::SendMessage) {
-      ++host_.ledger.messagesReceived;
-    }
+    const WorkLane::Scope scope(&lane_);
     dispatchRequest(request, *object_, weak_from_this());
   }
 }
 
-void SocketConnection::serveHeldRequest() {
-  const LogClientScope scope(client_);
-  if (state_ != State::Open || !heldRequest_) return;
-  wire::DecodedRequest request = std::move(*heldRequest_);
-  heldRequest_.reset();
-  serveRequest(request);
-  serveFrames();
-  if (state_ == State::Open && !heldRequest_) {
-    watch(watchedEvents_ | EPOLLIN);
+// The request stays here until it can be served. Only one of a connection does, but there may be many connections.
+void SocketConnection::hold(wire::DecodedRequest& request, std::size_t frameBytes) {
+  const std::size_t limit = host_.limits.quotas.waitingBytesPerUser;
+  if (const std::size_t use = party().waitingBytes; use + frameBytes > limit) {
+    refuseRequest(request.id, overQuota("waiting_bytes", use, limit));
+    return;
   }
+  heldRequest_ = std::move(request);
+  heldBytes_ = frameBytes;
+  host_.gate.countHeld();
+  host_.shares.ready(self());
+  countWaitingBytes(0);
+}
+
+// All that was sent before it is dealt with by now; what that handed over is to be committed.
+void SocketConnection::settle(std::uint64_t id) {
+  host_.settle([sink = weak_from_this(), id] {
+    if (const auto connection = sink.lock()) {
+      connection->sendReply(id, {});
+    }
+  });
+}
+
+std::string SocketConnection::quotaRefusal(const wire::Request& request) {
+  const HostLimits::Quotas& quotas = host_.limits.quotas;
+  if (request.operation == wire::Operation::SendMessage) {
+    if (quotas.messagesPerSecondPerConnection == 0 && quotas.messagesPerSecondPerUser == 0) return {};
+    const auto second = std::chrono::duration_cast<std::chrono::seconds>(host_.loop.clock().monotonic()).count();
+    if (beyondRate(rate_, quotas.messagesPerSecondPerConnection, second)) {
+      return overQuota("messages_per_second", rate_.messages, quotas.messagesPerSecondPerConnection);
+    }
+    if (beyondRate(party().rate, quotas.messagesPerSecondPerUser, second)) {
+      return overQuota("messages_per_second", party().rate.messages, quotas.messagesPerSecondPerUser);
+    }
+  } else if (request.operation == wire::Operation::CreateReportingSession && !object_->hasSession(request.reporterID)) {
+    countSessions();
+    if (countedSessions_ >= quotas.sessionsPerConnection) {
+      return overQuota("sessions", countedSessions_, quotas.sessionsPerConnection);
+    }
+    if (party().sessions >= quotas.sessionsPerUser) {
+      return overQuota("sessions", party().sessions, quotas.sessionsPerUser);
+    }
+  }
+  return {};
+}
+
+void SocketConnection::refuseRequest(std::uint64_t id, const std::string& why) {
+  lane_.spend(1);
+  host_.ledger.countRefusal(wire::ErrorCode::OverQuota);
+  sendError(id, {wire::kErrorDomain, static_cast<std::int64_t>(wire::ErrorCode::OverQuota), why});
 }
 
 // The socket then yields what came before and its end, in this order.
@@ -206,6 +378,14 @@ void SocketConnection::replyAppended() {
 void SocketConnection::flush() {
   const LogClientScope scope(client_);
   flushAsked_ = false;
+  if (queued() && host_.gathersReplies && host_.gate.open() && unsentBytes() < kGatheredReplyBytes &&
+      flushesPutOff_ < kMostFlushesPutOff) {
+    ++flushesPutOff_;
+    flushAsked_ = true;
+    host_.loop.flushLater(shared_from_this());
+    return;
+  }
+  flushesPutOff_ = 0;
   if (!socket_ || !sendSome()) return;
   if (unsentBytes() == 0) {
     host_.ledger.repliesSent += std::exchange(unsentReplies_, 0);
@@ -280,14 +460,19 @@ void SocketConnection::cut(CutReason reason, const std::string& why) {
 
 void SocketConnection::beginEnd(bool interrupted) {
   state_ = interrupted ? State::Ended : State::Ending;
-  heldRequest_.reset();
-  const auto self = shared_from_this();
+  if (heldRequest_) {
+    host_.gate.countReleased();
+    heldRequest_.reset();
+  }
+  countWaitingBytes(0);
   watch(0);
   if (interrupted) {
     dropOutput();
     socket_.reset();
   }
-  host_.loop.queue()->async([self, interrupted] { self->finish(interrupted); });
+  // Run by takeTurn(), while this lives.
+  host_.loop.queue()->asyncIn(lane_, [this, interrupted] { finish(interrupted); });
+  host_.shares.ready(self());
 }
 
 void SocketConnection::finish(bool interrupted) {
@@ -304,6 +489,8 @@ void SocketConnection::finish(bool interrupted) {
     handler();
   }
   object_.reset();
+  countSessions();
+  --party().connections;
 }
 
 }  // namespace tarn::linux_host

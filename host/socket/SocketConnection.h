@@ -2,12 +2,14 @@
 // object, and sends the replies.
 //
 // The client is not trusted. Its input is bounded by the largest frame, its unsent replies by a limit, its share of a
-// turn by one gulp; a frame that can be answered is answered, one that can't ends this connection and no other.
+// turn by what FairShares gives it; a frame that can be answered is answered, one that can't ends this connection and
+// no other. A frame is decoded when it is its turn, and the next one when all the work of the one before is done: so
+// what waits is bytes, never requests, and long work that gives way isn't overtaken by what its client sent after it.
 //
 // Life: made by the listener, resumed by the delegate, then held by the loop until its end. At the end the frames that
-// came whole have been handed to the object; behind their work on the server queue come the interruption handler (when
+// came whole have been handed to the object; after their work on the server queue come the interruption handler (when
 // the end was not in order), the invalidation handler and the close, so replies to a client that only half-closed go
-// out.
+// out. Of a client that is gone altogether, what only asks is dropped.
 //
 // Threads: the main loop's.
 #pragma once
@@ -26,8 +28,9 @@ namespace tarn::linux_host {
 
 class SocketConnection final : public platform::Connection,
                                public EventHandler,
-                               public HeldConnection,
                                public OpenConnection,
+                               public ShareHolder,
+                               public HalfFrames::Holder,
                                public ReplySink,
                                public std::enable_shared_from_this<SocketConnection> {
  public:
@@ -46,11 +49,17 @@ class SocketConnection final : public platform::Connection,
   void setInterruptionHandler(Handler handler) override { interruptionHandler_ = std::move(handler); }
   void setInvalidationHandler(Handler handler) override { invalidationHandler_ = std::move(handler); }
   void resume() override;
+  // For a user that has as many connections as it may: instead of setting it up and resuming it. It answers every
+  // request but `status` with this text until the client ends it.
+  void refuse(std::string why);
+  std::uint32_t user() const noexcept { return party().user; }
 
   void handleEvents(std::uint32_t events) override;
   void flush() override;
-  void serveHeldRequest() override;
   void endInput() override;
+  Turn takeTurn(std::int64_t credit) override;
+  void finishWork() override;
+  void endHalfFrame(const std::string& why) override;
 
   void sendReply(std::uint64_t id, std::initializer_list<plist::ValueView> results) override;
   void sendNumbers(std::uint64_t id, std::span<const std::int64_t> numbers) override;
@@ -65,11 +74,25 @@ class SocketConnection final : public platform::Connection,
     Ended,
   };
 
+  std::shared_ptr<ShareHolder> self() { return shared_from_this(); }
   void watch(std::uint32_t events);
-  void receive();
-  void serveFrames();
+  // Whether bytes came.
+  bool receive();
+  // Does the next thing that is to be done; whether there was one.
+  bool serveNext();
+  bool serveNextFrame();
   void serveFrame(std::span<const std::byte> frame);
-  void serveRequest(wire::DecodedRequest& request);
+  void serveRequest(wire::DecodedRequest& request, std::size_t frameBytes);
+  void hold(wire::DecodedRequest& request, std::size_t frameBytes);
+  void settle(std::uint64_t id);
+  // Why the request is beyond a quota; empty when it is not.
+  std::string quotaRefusal(const wire::Request& request);
+  void refuseRequest(std::uint64_t id, const std::string& why);
+  // Keeps what is known of the user's use in step.
+  void countSessions();
+  void countWaitingBytes(std::size_t half);
+  // While the gate is shut: answers `status` and stops at the first other request.
+  void stopAtHead(std::uint32_t events);
 
   // Whether a reply can still be sent; counts it as dropped when not.
   bool takesReplies() noexcept;
@@ -95,13 +118,24 @@ class SocketConnection final : public platform::Connection,
   Handler invalidationHandler_;
 
   wire::FrameBuffer frames_;
+  bool inputWaits_ = false;  // the socket may have bytes
+  bool peerGone_ = false;    // nobody will read a reply
+  WorkLane lane_;
   std::optional<wire::DecodedRequest> heldRequest_;  // the head request while the gate is shut
-  std::uint32_t watchedEvents_ = 0;                  // 0: not watched at all
+  std::size_t heldBytes_ = 0;                        // of its frame
+  std::string refusal_;                              // the answer to every request; empty: they are served
+  std::size_t countedSessions_ = 0;                  // by the user's party
+  std::size_t countedBytes_ = 0;
+  MessageRate rate_;
+  HalfFrames::Place halfFrame_;
+  bool framesTaken_ = false;         // since the half frame was noted
+  std::uint32_t watchedEvents_ = 0;  // 0: not watched at all
 
   std::string output_;
   std::size_t sentBytes_ = 0;        // of output_
   std::uint64_t unsentReplies_ = 0;  // in output_
   bool flushAsked_ = false;
+  int flushesPutOff_ = 0;
   bool outputBroken_ = false;  // the peer takes nothing more
   bool resetSeen_ = false;
 };

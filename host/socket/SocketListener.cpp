@@ -6,6 +6,7 @@
 #include <cerrno>
 
 #include "host/log/PrefixedLog.h"
+#include "host/socket/Quotas.h"
 #include "host/socket/SocketConnection.h"
 
 namespace tarn::linux_host {
@@ -85,7 +86,15 @@ void SocketListener::take(UniqueDescriptor client) {
   const auto connection = std::make_shared<SocketConnection>(host_, std::move(client), nextNumber_++);
   const LogClientScope scope(connection->client());
   const auto delegate = delegate_.lock();
-  if (delegate == nullptr || !delegate->listenerShouldAcceptNewConnection(connection)) {
+  const std::size_t limit = host_.limits.quotas.connectionsPerUser;
+  const std::size_t use = host_.shares.partyOf(connection->user())->connections;
+  if (use >= 2 * limit) {
+    // Closed without a word: its user was told on as many connections as it may have.
+    logPrefixed(host_.log, kConnectionCategory, platform::LogLevel::Error, kModule,
+                "refused " + connection->description() + ": " + overQuota("connections", use, limit));
+  } else if (use >= limit) {
+    connection->refuse(overQuota("connections", use, limit));
+  } else if (delegate == nullptr || !delegate->listenerShouldAcceptNewConnection(connection)) {
     logPrefixed(host_.log, kConnectionCategory, platform::LogLevel::Error, kModule,
                 "refused " + connection->description() + ": the service takes no client now");
   }

@@ -46,7 +46,8 @@ TEST(PublicRequests, EachOperationIsThatOfTheWire) {
       {tarnkit::reporterID(5), reporterID(5)},
       {tarnkit::getAllReporters(), getAllReporters()},
       {tarnkit::killService(), killService()},
-      {tarnkit::status(), status()}};
+      {tarnkit::status(), status()},
+      {tarnkit::settle(), settle()}};
   std::set<Operation> seen;
   for (const auto& [request, ours] : rows) {
     EXPECT_EQ(frameOf(request.content()), frameOf(ours)) << wire::operationName(ours.operation);

@@ -1,9 +1,10 @@
 // tarnreportingctl's contract with scripts: exit statuses, replies, complaints.
 #include <fcntl.h>
 #include <unistd.h>
-#include <csignal>
 
 #include <array>
+#include <csignal>
+#include <fstream>
 
 #include "tests/e2e/ServiceFixture.h"
 
@@ -227,6 +228,28 @@ TEST_F(Ctl, StatusAndReportersTellWhatIsThere) {
   const std::string text = ctl({"status"}).output;
   EXPECT_NE(text.find("the service is up"), std::string::npos) << text;
   EXPECT_NE(text.find("recorder_committed"), std::string::npos) << text;
+}
+
+TEST_F(Ctl, QuotasAreToldBeforeTheyAreUsedUpAndRefusalsNameThem) {
+  const std::string file = directory_ / "service.toml";
+  std::ofstream(file) << "[limits]\nsessions_per_connection = 2\n";
+  ASSERT_TRUE(startService({"--config", file}));
+  const auto client = connect();
+  ASSERT_TRUE(client->call(client::createReportingSession(1)).ok());
+  ASSERT_TRUE(client->call(client::createReportingSession(2)).ok());
+  const std::string text = ctl({"status", "--quotas"}).output;
+  EXPECT_NE(text.find("sessions_per_connection 2\n"), std::string::npos) << text;
+  EXPECT_NE(text.find("uid " + std::to_string(::getuid()) + ": connections 2 sessions 2 waiting_bytes 0\n"),
+            std::string::npos)
+      << text;
+  const json quotas = json::parse(ctl({"status", "--quotas", "--json"}).output);
+  EXPECT_EQ(quotas.at("limits").at("sessions_per_connection"), 2);
+  const client::Reply refused = client->call(client::createReportingSession(3));
+  EXPECT_EQ(refused.outcome, client::Outcome::Error);
+  EXPECT_EQ(refused.error.code, 4);
+  EXPECT_EQ(refused.error.text, "over quota: sessions 2 of 2");
+  EXPECT_TRUE(client->call(client::createReportingSession(2)).ok());
+  EXPECT_EQ(status().at("requests_refused").at("over_quota"), 1);
 }
 
 }  // namespace

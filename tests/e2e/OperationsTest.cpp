@@ -256,5 +256,38 @@ TEST_F(Operations, ASessionCountsOnAfterARestart) {
   EXPECT_TRUE(events("*.IO.Start").empty());
 }
 
+TEST_F(Operations, SettleIsAnsweredWhenWhatItsConnectionSentIsOnTheDisk) {
+  const auto client = connect();
+  ASSERT_TRUE(client->call(client::createReportingSession(7)).ok());
+  client->send(client::startReportingSessionForID(7));
+  for (int i = 0; i < 50; ++i) {
+    client->send(client::sendMessage({{"a", i}}, 4, 1, std::vector<std::int64_t>{7}));
+  }
+  ASSERT_TRUE(client->call(client::settle()).ok());
+  EXPECT_EQ(events("sys.oxbow.tarnkit.Playback.Start").size(), 50U);
+}
+
+TEST_F(Operations, EachMessageIsInOneMemberOfTheLedger) {
+  const auto client = connect();
+  ASSERT_TRUE(client->call(client::createReportingSession(7)).ok());
+  client->send(client::startReportingSessionForID(7));
+  const auto sendTo = [&client](std::int64_t reporterID, int value) {
+    client->send(client::sendMessage({{"a", value}}, 4, 1, std::vector<std::int64_t>{reporterID}));
+  };
+  sendTo(7, 1);
+  sendTo(7, 2);
+  sendTo(7, 2);
+  sendTo(99, 1);
+  ASSERT_TRUE(client->call(client::settle()).ok());
+  const json ledger = ledgerAtRest();
+  EXPECT_EQ(ledger.at("messages_received"), 4);
+  EXPECT_EQ(ledger.at("messages_delivered"), 2);
+  EXPECT_EQ(ledger.at("messages_redundant"), 1);
+  EXPECT_EQ(ledger.at("messages_without_session"), 1);
+  for (const char* empty : {"messages_unwanted", "messages_undeliverable", "messages_refused", "messages_waiting"}) {
+    EXPECT_EQ(ledger.at(empty), 0) << empty;
+  }
+}
+
 }  // namespace
 }  // namespace tarn::e2e

@@ -134,6 +134,21 @@ TEST_F(LinuxPlatformTest, RequestsWaitWhileTheWorkersQueuesAreFull) {
   expectPauseUntil([this] { letGo_.set_value(); });
 }
 
+TEST_F(LinuxPlatformTest, SettleIsAnsweredWhenWhatTheQueuesHoldAndTheRecorderHasIsCommitted) {
+  configuration_.recorder.groupTime = configuration_.recorder.quietTime = 1h;
+  startAndServe();
+  const auto queue = heldQueue();
+  queue->async([this] { record("from a queue"); });
+  record("at once");
+  TestClient client(socket());
+  ASSERT_TRUE(client.request(1, testing::requestOf(wire::Operation::Settle)));
+  ASSERT_TRUE(TestClient(socket()).status());
+  EXPECT_FALSE(client.readable(20));
+  letGo_.set_value();
+  ASSERT_TRUE(client.reply());
+  EXPECT_EQ(recorded(), (std::vector<std::string>{"wattlog at once", "wattlog from a queue"}));
+}
+
 TEST_F(LinuxPlatformTest, StatusTellsSessionsQueuedWorkAndTheRecordersCounters) {
   configuration_.recorder.groupTime = configuration_.recorder.quietTime = 1h;
   startAndServe();

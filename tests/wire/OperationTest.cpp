@@ -32,8 +32,15 @@ TEST(Operation, StatusIsNumber100) {
   EXPECT_EQ(operationFromName("status"), Operation::Status);
 }
 
+TEST(Operation, SettleIsNumber101AndTheHostsOwn) {
+  EXPECT_EQ(operationFromNumber(101), Operation::Settle);
+  EXPECT_EQ(operationFromName("settle"), Operation::Settle);
+  EXPECT_EQ(rowOf(Operation::Settle).servedBy, ServedBy::Host);
+  EXPECT_EQ(rowOf(Operation::Settle).arguments.size(), 0U);
+}
+
 TEST(Operation, NumbersBesideTheListAreNoOperation) {
-  for (const std::uint64_t number : {0ULL, 12ULL, 99ULL, 101ULL, 256ULL + 1, 0xFFFFFFFFFFFFFFFFULL}) {
+  for (const std::uint64_t number : {0ULL, 12ULL, 99ULL, 102ULL, 256ULL + 1, 0xFFFFFFFFFFFFFFFFULL}) {
     EXPECT_FALSE(operationFromNumber(number).has_value()) << number;
   }
 }
@@ -48,6 +55,7 @@ TEST(Operation, ErrorDomainAndCodesAreFixed) {
   EXPECT_EQ(static_cast<int>(ErrorCode::UnknownOperation), 1);
   EXPECT_EQ(static_cast<int>(ErrorCode::BadArguments), 2);
   EXPECT_EQ(static_cast<int>(ErrorCode::NotPropertyList), 3);
+  EXPECT_EQ(static_cast<int>(ErrorCode::OverQuota), 4);
 }
 
 }  // namespace

@@ -74,6 +74,28 @@ TEST(RequestDecoder, NullStandsForNoReporterIDsAndAnEmptyArrayForAnEmptyOne) {
   EXPECT_TRUE(empty.request.reporterIDs->empty());
 }
 
+// A message to so many sessions, all of ID 7; `open`: with a list of indefinite length.
+std::string messageTo(std::size_t count, bool open) {
+  std::string frame = testing::fromHex("860706a00000");
+  frame += testing::fromHex(open ? "9f" : "9a");
+  for (int shift = 24; !open && shift >= 0; shift -= 8) {
+    frame += static_cast<char>(count >> static_cast<unsigned>(shift));
+  }
+  frame += std::string(count, '\x07');
+  return open ? frame + '\xff' : frame;
+}
+
+TEST(RequestDecoder, AListOfIDsHasAtMost65536Entries) {
+  for (const bool open : {false, true}) {
+    const Decoded most = testing::decodeBytes(messageTo(65536, open));
+    ASSERT_TRUE(most.ok());
+    EXPECT_EQ(most.request.reporterIDs->size(), 65536U);
+    const Decoded more = testing::decodeBytes(messageTo(65537, open));
+    EXPECT_EQ(more.code(), 2);
+    EXPECT_EQ(more.refusal.text, "sendMessage: reporter IDs: at most 65536 expected");
+  }
+}
+
 TEST(RequestDecoder, NothingOfAnEarlierRequestRemains) {
   RequestDecoder decoder;
   DecodedRequest request;
@@ -122,7 +144,7 @@ TEST(RequestDecoder, AnOpenEndedFrameIsAsGoodAsOneOfKnownLength) {
 // Answered with code 1.
 
 TEST(RequestDecoder, UnknownOperationsAreAnsweredWithTheirID) {
-  for (const char* number : {"00", "0c", "1863", "1865", "1bffffffffffffffff", "20", "6161", "f6", "80"}) {
+  for (const char* number : {"00", "0c", "1863", "1866", "1bffffffffffffffff", "20", "6161", "f6", "80"}) {
     const Decoded decoded = decodeHex(std::string("831864") + number + "01");
     EXPECT_EQ(decoded.code(), 1) << number;
     EXPECT_EQ(decoded.request.id, 100U);

@@ -21,6 +21,7 @@ EXCEPTIONS = {
     ("recorder/store/MappedGuard.cpp", "once"): "the handler is installed once a process",
     ("host/loop/CurrentQueue.h", "current_"): "which queue a thread serves belongs to the thread",
     ("host/log/LogClient.h", "current_"): "for whom a thread works belongs to the thread",
+    ("host/loop/WorkLane.h", "current_"): "and so does whose work of it that is",
 }
 
 OTHER = re.compile(r"(?:using|typedef|static_assert|friend|template|concept|namespace|class|struct|union|enum|extern|"

@@ -75,6 +75,38 @@ TEST_F(LinuxWorkQueuesTest, ABlockedQueueDoesNotHoldUpAnother) {
   finish(*blocked);
 }
 
+TEST_F(LinuxWorkQueuesTest, WhatIsUnfinishedOnAnyQueueIsWaitedForAndNothingThatComesLater) {
+  const auto running = make();
+  const auto suspended = makeSuspendable();
+  std::promise<void> release;
+  std::atomic<int> finished{0};
+  running->async([&, future = release.get_future().share()] { future.wait(); });
+  running->async([&] { ++finished; });
+  std::promise<void> isSuspended;
+  suspended->async([&] {
+    suspended->suspend(1h, [&] { ++finished; });
+    isSuspended.set_value();
+  });
+  isSuspended.get_future().get();
+  std::promise<int> seen;
+  queues_.afterWhatIsUnfinished([&] { seen.set_value(finished); });
+  auto after = seen.get_future();
+  EXPECT_EQ(after.wait_for(20ms), std::future_status::timeout);
+  release.set_value();
+  EXPECT_EQ(after.wait_for(20ms), std::future_status::timeout);
+  suspended->resume();
+  EXPECT_EQ(after.get(), 2);
+}
+
+TEST_F(LinuxWorkQueuesTest, WhenNothingIsUnfinishedItIsAfterThatAtOnce) {
+  const auto queue = make();
+  finish(*queue);
+  EXPECT_TRUE(eventually([&] { return queues_.unfinished() == 0; }));
+  bool called = false;
+  queues_.afterWhatIsUnfinished([&] { called = true; });
+  EXPECT_TRUE(called);
+}
+
 // All threads of the pool are busy, so that nobody else comes to what waits.
 TEST_F(LinuxWorkQueuesTest, HelpRunsWhatWaitsOnTheCallersThreadAsWorkOfTheQueue) {
   std::promise<void> release;

@@ -18,13 +18,14 @@ TEST(Ledger, StatusHasEveryMemberFromTheStart) {
     EXPECT_EQ(status.get(member), plist::ValueView(0)) << member;
   }
   EXPECT_EQ(plist::description(status.get("requests_refused")),
-            "{unknown_operation = 0; bad_arguments = 0; not_property_list = 0}");
-  EXPECT_EQ(plist::description(status.get("connections_cut")),
-            "{unreadable_frame = 0; oversize_frame = 0; unread_replies = 0; half_frame = 0; reset = 0}");
+            "{unknown_operation = 0; bad_arguments = 0; not_property_list = 0; over_quota = 0}");
+  EXPECT_EQ(
+      plist::description(status.get("connections_cut")),
+      "{unreadable_frame = 0; oversize_frame = 0; unread_replies = 0; half_frame = 0; stale_frame = 0; reset = 0}");
 }
 
 TEST(Ledger, StatusTellsWhatOthersCount) {
-  const auto status = Ledger().status(3, 4, {10, 7, 2, 5, 1, 6});
+  const auto status = Ledger().status(std::uint64_t{3}, 4, {10, 7, 2, 5, 1, 6});
   EXPECT_EQ(status.get("sessions").asInt64(), 3);
   EXPECT_EQ(status.get("queued").asInt64(), 4);
   EXPECT_EQ(status.get("recorder_handed_over").asInt64(), 10);
@@ -42,9 +43,31 @@ TEST(Ledger, CountsRefusalsAndCutsByReason) {
   ledger.countCut(CutReason::UnreadReplies);
   const auto status = ledger.status(0, 0, {});
   EXPECT_EQ(plist::description(status.get("requests_refused")),
-            "{unknown_operation = 0; bad_arguments = 2; not_property_list = 0}");
-  EXPECT_EQ(plist::description(status.get("connections_cut")),
-            "{unreadable_frame = 0; oversize_frame = 0; unread_replies = 1; half_frame = 0; reset = 0}");
+            "{unknown_operation = 0; bad_arguments = 2; not_property_list = 0; over_quota = 0}");
+  EXPECT_EQ(
+      plist::description(status.get("connections_cut")),
+      "{unreadable_frame = 0; oversize_frame = 0; unread_replies = 1; half_frame = 0; stale_frame = 0; reset = 0}");
+}
+
+TEST(Ledger, EachMessageIsInOneMember) {
+  Ledger ledger;
+  ledger.messagesReceived = 100;
+  ledger.messagesOverQuota = 4;
+  ServiceCounts service;
+  service.delivered = 40;
+  service.redundant = 20;
+  service.unwanted = 10;
+  service.undeliverable = 5;
+  service.withoutSession = 8;
+  service.refused = 3;
+  const auto status = ledger.status(service, 0, {});
+  EXPECT_EQ(status.get("messages_delivered").asInt64(), 40);
+  EXPECT_EQ(status.get("messages_redundant").asInt64(), 20);
+  EXPECT_EQ(status.get("messages_unwanted").asInt64(), 10);
+  EXPECT_EQ(status.get("messages_undeliverable").asInt64(), 5);
+  EXPECT_EQ(status.get("messages_without_session").asInt64(), 8);
+  EXPECT_EQ(status.get("messages_refused").asInt64(), 7);
+  EXPECT_EQ(status.get("messages_waiting").asInt64(), 10);
 }
 
 TEST(DescriptorLimit, LeavesRoomForTheRestOfTheProcess) {

@@ -1,6 +1,7 @@
 #include "tests/host/socket/RecordingService.h"
 
 #include <algorithm>
+#include <set>
 
 #include "plist/ValueView.h"
 
@@ -12,7 +13,11 @@ class RecordingService::Client final : public platform::TarnReportingServiceProt
   Client(RecordingService& service, int number) : service_(service), prefix_(std::to_string(number) + " ") {}
 
   void createReportingSession(std::int64_t reporterID, platform::Acknowledge reply) override {
-    acknowledged("createReportingSession " + std::to_string(reporterID), std::move(reply));
+    work("createReportingSession " + std::to_string(reporterID),
+         [this, reporterID, reply = std::move(reply)]() mutable {
+           sessions_.insert(reporterID);
+           reply(std::nullopt, true);
+         });
   }
   void setServiceType(std::uint16_t serviceType, std::int64_t reporterID, platform::Acknowledge reply) override {
     acknowledged("setServiceType " + std::to_string(serviceType) + " " + std::to_string(reporterID), std::move(reply));
@@ -49,7 +54,13 @@ class RecordingService::Client final : public platform::TarnReportingServiceProt
          });
   }
   void stopReportingSessionForID(std::int64_t reporterID, platform::Acknowledge reply) override {
-    acknowledged("stopReportingSessionForID " + std::to_string(reporterID), std::move(reply));
+    if (service_.slices == 0) {
+      acknowledged("stopReportingSessionForID " + std::to_string(reporterID), std::move(reply));
+      return;
+    }
+    service_.queue_->async([this, reporterID, reply = std::move(reply)]() mutable {
+      stopInSlices(reporterID, service_.slices, std::move(reply));
+    });
   }
   void destroyReportingSession(std::int64_t reporterID, platform::Acknowledge reply) override {
     work("destroyReportingSession " + std::to_string(reporterID), [reply = std::move(reply)]() mutable {
@@ -70,11 +81,29 @@ class RecordingService::Client final : public platform::TarnReportingServiceProt
   void killService() override {
     work("killService", [] {});
   }
+  std::size_t sessionCount() const override { return sessions_.size(); }
+  bool hasSession(std::int64_t reporterID) const override { return sessions_.contains(reporterID); }
 
  private:
+  void stopInSlices(std::int64_t reporterID, int left, platform::Acknowledge reply) {
+    for (; left != 0; --left) {
+      service_.events.push_back(prefix_ + "slice");
+      if (service_.onSlice) {
+        service_.onSlice(left - 1);
+      }
+      if (service_.queue_->spend(4)) {
+        service_.queue_->asyncNext([this, reporterID, left, reply = std::move(reply)]() mutable {
+          stopInSlices(reporterID, left - 1, std::move(reply));
+        });
+        return;
+      }
+    }
+    service_.events.push_back(prefix_ + "stopped " + std::to_string(reporterID));
+    reply(std::nullopt, true);
+  }
   template <class Body>
   void work(std::string event, Body body) {
-    service_.mostWaiting = std::max(service_.mostWaiting, service_.queue_->ready());
+    service_.mostWaiting = std::max(service_.mostWaiting, service_.queue_->waiting());
     service_.queue_->async([this, event = std::move(event), body = std::move(body)]() mutable {
       service_.events.push_back(prefix_ + event);
       body();
@@ -86,6 +115,7 @@ class RecordingService::Client final : public platform::TarnReportingServiceProt
 
   RecordingService& service_;
   std::string prefix_;
+  std::set<std::int64_t> sessions_;  // those that were made
 };
 
 bool RecordingService::listenerShouldAcceptNewConnection(const std::shared_ptr<platform::Connection>& connection) {

@@ -1,0 +1,80 @@
+// WorkLane: what one client has waiting on the server queue, in its own order, and how much of its turn is left.
+//
+// Work that is handed over while a scope of the lane lives goes to the lane and not to the queue's own list, so that
+// whoever schedules the lanes decides which client's work is next. The rest of a piece that gave way stands ahead of
+// what waits: the order within one client is that of its requests.
+//
+// Owned by a connection. Threads: the one that serves the queue.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <utility>
+#include <vector>
+
+#include "platform/WorkQueue.h"
+
+namespace tarn::linux_host {
+
+class WorkLane {
+ public:
+  // While it lives the thread's work on the server queue is for this lane; null: for the queue itself.
+  class Scope {
+   public:
+    explicit Scope(WorkLane* lane) noexcept : previous_(std::exchange(current_, lane)) {}
+    Scope(const Scope&) = delete;
+    Scope& operator=(const Scope&) = delete;
+    ~Scope() { current_ = previous_; }
+
+   private:
+    WorkLane* previous_;
+  };
+
+  // `queue` tells lanes of one queue from those of another.
+  explicit WorkLane(const platform::WorkQueue* queue) noexcept : queue_(queue) {}
+  WorkLane(const WorkLane&) = delete;
+  WorkLane& operator=(const WorkLane&) = delete;
+
+  // The lane that the calling thread works for on this queue; null for none.
+  static WorkLane* currentOf(const platform::WorkQueue* queue) noexcept {
+    return current_ != nullptr && current_->queue_ == queue ? current_ : nullptr;
+  }
+
+  bool empty() const noexcept { return !rest_ && next_ == pieces_.size(); }
+  void add(platform::Work work) { pieces_.push_back(std::move(work)); }
+  void addNext(platform::Work rest) { rest_ = std::move(rest); }
+  // The next piece; only when there is one.
+  platform::Work take() {
+    if (rest_) return std::move(rest_);
+    platform::Work work = std::move(pieces_[next_++]);
+    if (next_ == pieces_.size()) {
+      pieces_.clear();
+      next_ = 0;
+    }
+    return work;
+  }
+
+  // A turn lasts until its credit is spent; what is spent beyond it counts too.
+  void beginTurn(std::int64_t credit) noexcept {
+    credit_ = credit;
+    spent_ = 0;
+    ended_ = false;
+  }
+  bool hasTurn() const noexcept { return !ended_ && spent_ < credit_; }
+  void endTurn() noexcept { ended_ = true; }
+  void spend(std::size_t cost) noexcept { spent_ += static_cast<std::int64_t>(cost); }
+  std::int64_t spent() const noexcept { return spent_; }
+
+ private:
+  static inline thread_local WorkLane* current_ = nullptr;
+
+  const platform::WorkQueue* queue_;
+  platform::Work rest_;  // of the piece that gave way
+  std::vector<platform::Work> pieces_;
+  std::size_t next_ = 0;
+  std::int64_t credit_ = 0;
+  std::int64_t spent_ = 0;
+  bool ended_ = false;
+};
+
+}  // namespace tarn::linux_host

@@ -1,0 +1,82 @@
+#include "host/socket/FairShares.h"
+
+#include <algorithm>
+#include <utility>
+
+namespace tarn::linux_host {
+
+namespace {
+
+// So many users are remembered before those that are gone are looked for.
+constexpr std::size_t kKeptUsers = 256;
+
+}  // namespace
+
+std::shared_ptr<ShareParty> FairShares::partyOf(std::uint32_t user) {
+  if (byUser_.size() > kKeptUsers) {
+    std::erase_if(byUser_, [](const auto& entry) { return entry.second.expired(); });
+  }
+  std::weak_ptr<ShareParty>& known = byUser_[user];
+  std::shared_ptr<ShareParty> party = known.lock();
+  if (party == nullptr) {
+    party = std::make_shared<ShareParty>(user);
+    known = party;
+  }
+  return party;
+}
+
+void FairShares::ready(const std::shared_ptr<ShareHolder>& holder) {
+  if (std::exchange(holder->queued_, true)) return;
+  const std::shared_ptr<ShareParty>& party = holder->party_;
+  (holder->credit_ < 0 ? party->seats : party->fresh).push_back(holder);
+  if (!std::exchange(party->queued, true)) {
+    party->credit = std::min(party->credit + kQuantum, kQuantum);
+    parties_.push_back(party);
+  }
+}
+
+// One turn of the first user's next seat; its cost. Both go to the end of their lines when their credit is spent.
+std::int64_t FairShares::serveOne() {
+  const std::shared_ptr<ShareParty> party = parties_.front();
+  if (party->credit <= 0) {
+    party->credit += kQuantum;
+    std::rotate(parties_.begin(), parties_.begin() + 1, parties_.end());
+    return parties_.size() == 1 ? 0 : 1;
+  }
+  const bool takesFresh = !party->fresh.empty() && (party->seats.empty() || party->freshTurns < kFreshTurns);
+  party->freshTurns = takesFresh ? party->freshTurns + 1 : 0;
+  auto& line = takesFresh ? party->fresh : party->seats;
+  const std::shared_ptr<ShareHolder> holder = std::move(line.front());
+  line.pop_front();
+  holder->credit_ = std::min(holder->credit_ + kQuantum, kQuantum);
+  if (holder->credit_ <= 0) {
+    party->seats.push_back(holder);
+    return 1;
+  }
+  holder->queued_ = false;  // what comes for it while it is served counts as more
+  const ShareHolder::Turn turn = holder->takeTurn(holder->credit_);
+  holder->credit_ = std::max(holder->credit_ - turn.cost, -kMostDebt);
+  party->credit = std::max(party->credit - turn.cost, -kMostDebt);
+  if (turn.more && !std::exchange(holder->queued_, true)) {
+    party->seats.push_back(holder);
+  }
+  if (party->fresh.empty() && party->seats.empty()) {
+    party->queued = false;
+    parties_.erase(std::find(parties_.begin(), parties_.end(), party));
+  }
+  return std::max<std::int64_t>(turn.cost, 1);
+}
+
+void FairShares::finishWork() {
+  for (const auto& party : std::exchange(parties_, {})) {
+    party->queued = false;
+    for (auto* line : {&party->fresh, &party->seats}) {
+      for (const auto& holder : std::exchange(*line, {})) {
+        holder->queued_ = false;
+        holder->finishWork();
+      }
+    }
+  }
+}
+
+}  // namespace tarn::linux_host

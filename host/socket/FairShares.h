@@ -1,0 +1,129 @@
+// FairShares: whose request is served next, when many connections have some.
+//
+// Which problem: a request can cost a microsecond or a second, and who sends many or dear ones must not hold up the
+// others. How: deficit round robin over the cost of what was done, first among users, then among a user's connections.
+//
+//   [user] [user] [user]            each visit: credit += kQuantum, served while it lasts
+//     |
+//     '- [seat] [seat] [seat]       each turn:  credit += kQuantum, one takeTurn() when that made it positive
+//
+// Who spent more than its credit waits until further visits have paid for it, so that one dear piece costs its sender
+// as many turns as many cheap ones. A seat is there only while its holder has something to do; when it is the only one
+// it is served on and on. Who comes anew and owes nothing is served ahead of the user's others, so that a request now
+// and then doesn't wait for a thousand connections that are busy all the time; every few turns one of those is served.
+//
+// Owned by ConnectionHost. Threads: the main loop's.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <deque>
+#include <memory>
+#include <unordered_map>
+
+namespace tarn::linux_host {
+
+class ShareHolder;
+
+// Messages in the second that runs.
+struct MessageRate {
+  std::int64_t second = 0;
+  std::size_t messages = 0;
+};
+
+// What one user's connections have in common.
+struct ShareParty {
+  explicit ShareParty(std::uint32_t theUser) noexcept : user(theUser) {}
+
+  const std::uint32_t user;
+  // What they have, for the quotas.
+  std::size_t connections = 0;
+  std::size_t sessions = 0;
+  std::size_t waitingBytes = 0;
+  MessageRate rate;
+
+  std::int64_t credit = 0;
+  bool queued = false;
+  std::deque<std::shared_ptr<ShareHolder>> fresh;  // those that have something to do again
+  std::deque<std::shared_ptr<ShareHolder>> seats;  // those that have something to do still
+  int freshTurns = 0;                              // since one of the seats was served
+};
+
+class ShareHolder {
+ public:
+  struct Turn {
+    std::int64_t cost;
+    bool more;  // it has more to do
+  };
+
+  explicit ShareHolder(std::shared_ptr<ShareParty> party) noexcept : party_(std::move(party)) {}
+  ShareHolder(const ShareHolder&) = delete;
+  ShareHolder& operator=(const ShareHolder&) = delete;
+  virtual ~ShareHolder() = default;
+
+  // Does what it has to do until that cost `credit` or more, or there is none left.
+  virtual Turn takeTurn(std::int64_t credit) = 0;
+  // Does at once what was begun or handed over for it, and takes nothing new up; for the end of the process.
+  virtual void finishWork() = 0;
+
+ protected:
+  // Whether it waits for a turn.
+  bool queued() const noexcept { return queued_; }
+  ShareParty& party() const noexcept { return *party_; }
+
+ private:
+  friend class FairShares;
+
+  const std::shared_ptr<ShareParty> party_;
+  std::int64_t credit_ = 0;
+  bool queued_ = false;
+};
+
+class FairShares {
+ public:
+  // Cost, in units of about a microsecond, that a visit is worth.
+  static constexpr std::int64_t kQuantum = 32;
+  // Nobody pays for more than this that was spent before.
+  static constexpr std::int64_t kMostDebt = 64 * kQuantum;
+  // Turns of those that came anew, after which one of the others is served.
+  static constexpr int kFreshTurns = 4;
+
+  FairShares() = default;
+  FairShares(const FairShares&) = delete;
+  FairShares& operator=(const FairShares&) = delete;
+
+  // The user's own, shared by all holders that live.
+  std::shared_ptr<ShareParty> partyOf(std::uint32_t user);
+  // Something came for the holder to do. Cheap when it waits for a turn already.
+  void ready(const std::shared_ptr<ShareHolder>& holder);
+  // Gives turns until they cost `budget` or more, or nobody has anything to do. `isOpen` is asked before each turn.
+  // Whether somebody is left who could go on at once.
+  template <class IsOpen>
+  bool serve(std::int64_t budget, IsOpen isOpen) {
+    while (!parties_.empty()) {
+      if (!isOpen()) return false;
+      if (budget <= 0) return true;
+      budget -= serveOne();
+    }
+    return false;
+  }
+  // Lets everybody finish what was begun.
+  void finishWork();
+  // Calls visit(party) for each user that has connections, in no order.
+  template <class Visit>
+  void forEachParty(Visit visit) const {
+    for (const auto& [user, known] : byUser_) {
+      if (const auto party = known.lock()) {
+        visit(*party);
+      }
+    }
+  }
+
+ private:
+  std::int64_t serveOne();
+
+  std::deque<std::shared_ptr<ShareParty>> parties_;  // the one whose visit it is comes first
+  std::unordered_map<std::uint32_t, std::weak_ptr<ShareParty>> byUser_;
+};
+
+}  // namespace tarn::linux_host

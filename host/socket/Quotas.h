@@ -1,0 +1,25 @@
+// Quotas: what one connection and one user may have, and the text that says so when there is no more.
+//
+// Threads: the main loop's.
+#pragma once
+
+#include <cstddef>
+#include <string>
+#include <string_view>
+
+#include "host/socket/FairShares.h"
+#include "host/socket/HostLimits.h"
+#include "plist/Dictionary.h"
+
+namespace tarn::linux_host {
+
+// "over quota: sessions 2000 of 2000"
+std::string overQuota(std::string_view quota, std::size_t use, std::size_t limit);
+
+// Whether one more message is beyond the rate; it counts when it isn't.
+bool beyondRate(MessageRate& rate, std::size_t limit, std::int64_t second) noexcept;
+
+// The bounds, and what each user that has connections has of them; part of `status`.
+plist::Dictionary quotaStatus(const HostLimits::Quotas& quotas, const FairShares& shares);
+
+}  // namespace tarn::linux_host

@@ -1,0 +1,28 @@
+// TarnReportingMessageCounts: what became of the messages that clients sent. Each message that was dealt with is in
+// exactly one of the members; of several sessions' outcomes the best counts, in the order of TarnReportingOutcome.
+// Plain data.
+#pragma once
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+
+namespace tarn {
+
+enum class TarnReportingOutcome : std::uint8_t {
+  Delivered,       // a session took it as news and a worker got it
+  Redundant,       // it said what the session's last one of its kind had said
+  Unwanted,        // no worker of its sessions was there to get it
+  Undeliverable,   // its sessions ended before their turn came
+  WithoutSession,  // nobody has a session under its IDs
+  Refused,         // reporting is disabled
+};
+
+struct TarnReportingMessageCounts {
+  std::array<std::uint64_t, 6> counts{};
+
+  void add(TarnReportingOutcome outcome) noexcept { ++counts[static_cast<std::size_t>(outcome)]; }
+  std::uint64_t of(TarnReportingOutcome outcome) const noexcept { return counts[static_cast<std::size_t>(outcome)]; }
+};
+
+}  // namespace tarn

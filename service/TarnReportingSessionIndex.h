@@ -1,0 +1,54 @@
+// TarnReportingSessionIndex: what all clients' sessions are together, so that nobody has to go through the clients for
+// it: who has a session under an ID, which clients have sessions at all, how many there are and run.
+//
+// A thousand clients that only stay connected cost a message, a start or a broadcast nothing this way.
+//
+// Owned by the service and shared with its clients' instances, which keep it in step with their maps. Threads: the
+// server queue; the service's lock guards it as it guards the list of clients.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <map>
+#include <unordered_map>
+
+namespace tarn {
+
+class TarnReportingClientServerInstance;
+
+class TarnReportingSessionIndex {
+ public:
+  using Client = TarnReportingClientServerInstance;
+  // Clients by their number, which is the order of connection.
+  using Clients = std::map<std::uint64_t, Client*>;
+
+  TarnReportingSessionIndex() = default;
+  TarnReportingSessionIndex(const TarnReportingSessionIndex&) = delete;
+  TarnReportingSessionIndex& operator=(const TarnReportingSessionIndex&) = delete;
+
+  // The client has one more session, or one less, under this ID.
+  void add(std::int64_t reporterID, std::uint64_t number, Client& client);
+  void remove(std::int64_t reporterID, std::uint64_t number);
+  // So many more sessions run; fewer, when it is negative.
+  void addRunning(std::ptrdiff_t count) noexcept { running_ += static_cast<std::size_t>(count); }
+
+  // The first client in the order of connection that has a session under this ID; null for none.
+  Client* firstHolder(std::int64_t reporterID) const;
+  // Those that have sessions.
+  const Clients& clients() const noexcept { return clients_; }
+  std::size_t sessionCount() const noexcept { return holders_.size(); }
+  std::size_t runningCount() const noexcept { return running_; }
+
+ private:
+  struct Holder {
+    std::uint64_t number;
+    Client* client;
+  };
+
+  std::unordered_multimap<std::int64_t, Holder> holders_;
+  std::unordered_map<std::uint64_t, std::size_t> sessionsOf_;
+  Clients clients_;
+  std::size_t running_ = 0;
+};
+
+}  // namespace tarn
