@@ -77,9 +77,8 @@ Status prepareConnection(Connection& connection) {
   const Result<std::int64_t> pages = connection.readInteger("PRAGMA page_count");
   if (pages.failed()) return pages.error;
   if (pages.value == 0) {
-    if (auto error = connection.errorOf(connection.run("PRAGMA page_size=8192; PRAGMA auto_vacuum=INCREMENTAL"))) {
-      return error;
-    }
+    auto error = connection.errorOf(connection.run("PRAGMA page_size=8192; PRAGMA auto_vacuum=INCREMENTAL"));
+    if (error.failed()) return error;
   }
   const int code = connection.run(
       "PRAGMA journal_mode=WAL; PRAGMA synchronous=FULL;"
@@ -129,7 +128,7 @@ Status checkTables(Connection& connection, std::int64_t lastId, bool& made) {
       "WHERE name IN ('event_groups', 'recorder_losses', 'recorder_times') AND type = 'table'");
   if (notes.failed()) return notes.error;
   const bool hasState = !state.value.empty();
-  return hasState && notes.value == 3 ? std::nullopt : addNotes(connection, hasState);
+  return hasState && notes.value == 3 ? Status() : addNotes(connection, hasState);
 }
 
 Result<std::int64_t> readLastId(Connection& connection) {
