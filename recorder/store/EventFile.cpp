@@ -97,7 +97,7 @@ Status EventFile::putOddCompanionsAside() {
     const std::filesystem::path aside = freeName(suffix);
     std::error_code error;
     std::filesystem::rename(name, aside, error);
-    if (error) {
+    if (error.failed()) {
       return Error{SQLITE_CANTOPEN, name + " is no regular file and can't be set aside: " + error.message()};
     }
     putAside_.push_back(aside.filename().string());
@@ -252,14 +252,14 @@ Result<std::filesystem::path> EventFile::setAside() {
   const std::filesystem::path aside = freeName("");
   std::error_code error;
   std::filesystem::rename(path_, aside, error);
-  if (!error) {
+  if (error.ok()) {
     expected_ = 0;
   }
-  if (error) return {{}, Error{error.value(), "it can't be set aside: " + error.message()}};
+  if (error.failed()) return {{}, Error{error.value(), "it can't be set aside: " + error.message()}};
   // The log and its index go along: what they hold belongs to the old file, and a fresh one must not find them.
   for (const char* const suffix : {"-wal", "-shm"}) {
     std::filesystem::rename(path_.string() + suffix, aside.string() + suffix, error);
-    if (error && error != std::errc::no_such_file_or_directory) {
+    if (error.failed() && error != std::errc::no_such_file_or_directory) {
       std::filesystem::remove(path_.string() + suffix, error);
     }
   }

@@ -2,6 +2,7 @@
 
 #include <sqlite3.h>
 
+#include <charconv>
 #include <string>
 #include <string_view>
 
@@ -67,8 +68,9 @@ bool tellsOfReading(std::string_view verdict) {
   constexpr std::string_view kCode = "error code=";
   const std::size_t at = verdict.find(kCode);
   if (at == std::string_view::npos) return false;
-  const std::string_view code = verdict.substr(at + kCode.size());
-  return !code.starts_with(std::to_string(SQLITE_CORRUPT)) && !code.starts_with(std::to_string(SQLITE_NOTADB));
+  int code = 0;
+  std::from_chars(verdict.data() + at + kCode.size(), verdict.data() + verdict.size(), code);
+  return (code & 0xFF) != SQLITE_CORRUPT && (code & 0xFF) != SQLITE_NOTADB;
 }
 
 }  // namespace
