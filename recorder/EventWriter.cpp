@@ -74,7 +74,7 @@ Status EventWriter::openOnce() {
   if (missing_) {
     if (auto error = noteMissing(); error.failed()) return error;
   }
-  return carrying_ ? carryOver() : std::nullopt;
+  return carrying_ ? carryOver() : Status();
 }
 
 void EventWriter::tellWhatOpeningFound() {
@@ -172,7 +172,7 @@ Result<std::size_t> EventWriter::writeOnce(const EventBatch& batch, std::size_t 
   const std::size_t most = transactionBytes(options_);
   std::size_t bytes = 0;
   std::size_t next = from;
-  for (; !error && next < batch.size() && bytes < most; ++next) {
+  for (; error.ok() && next < batch.size() && bytes < most; ++next) {
     const EventBatch::Event& event = batch[next];
     const std::string& payload = payloadText(event.payload);
     detailText_.clear();
@@ -189,7 +189,7 @@ Result<std::size_t> EventWriter::writeOnce(const EventBatch& batch, std::size_t 
   if (error.ok()) {
     error = file_.commit();
   }
-  return {error ? 0 : next - from, error};
+  return {error.failed() ? 0 : next - from, error};
 }
 
 // The two events of a message carry one payload, which becomes text once.

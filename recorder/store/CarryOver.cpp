@@ -121,9 +121,8 @@ Status CarryOver::writeSome(EventFile& into) {
   if (some_.empty()) return {};
   if (auto error = into.begin(); error.failed()) return error;
   for (const Read& row : some_) {
-    if (auto error = into.carry(row.id, row.seconds, {row.time, row.backend, row.name, row.payload, row.detail})) {
-      return error;
-    }
+    auto error = into.carry(row.id, row.seconds, {row.time, row.backend, row.name, row.payload, row.detail});
+    if (error.failed()) return error;
   }
   if (auto error = into.commit(); error.failed()) return error;
   for (const Read& row : some_) {
@@ -152,7 +151,7 @@ Status CarryOver::finish(EventFile& into) {
   if (first_ == 0 && lost_.empty()) return {};
   if (auto error = into.begin(); error.failed()) return error;
   Status error;
-  for (std::size_t i = 0; !error && i < lost_.size(); ++i) {
+  for (std::size_t i = 0; error.ok() && i < lost_.size(); ++i) {
     error = into.noteLoss(lost_[i]);
   }
   const std::int64_t begins =

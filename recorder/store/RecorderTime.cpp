@@ -52,7 +52,7 @@ Status RecorderTime::open(Connection& connection) {
     begun_ = true;
   }
   const bool goesOn = noted.value.sameBoot && std::abs(noted.value.seconds - seconds()) < kTolerance;
-  return goesOn ? std::nullopt : note(connection);
+  return goesOn ? Status() : note(connection);
 }
 
 Result<RecorderTime::Noted> RecorderTime::readNoted(Connection& connection) const {

@@ -2,6 +2,7 @@
 
 #include <sqlite3.h>
 
+#include <charconv>
 #include <string>
 #include <string_view>
 
@@ -67,8 +68,9 @@ bool tellsOfReading(std::string_view verdict) {
   constexpr std::string_view kCode = "error code=";
   const std::size_t at = verdict.find(kCode);
   if (at == std::string_view::npos) return false;
-  const std::string_view code = verdict.substr(at + kCode.size());
-  return !code.starts_with(std::to_string(SQLITE_CORRUPT)) && !code.starts_with(std::to_string(SQLITE_NOTADB));
+  int code = 0;
+  std::from_chars(verdict.data() + at + kCode.size(), verdict.data() + verdict.size(), code);
+  return (code & 0xFF) != SQLITE_CORRUPT && (code & 0xFF) != SQLITE_NOTADB;
 }
 
 }  // namespace
@@ -77,9 +79,8 @@ Status prepareConnection(Connection& connection) {
   const Result<std::int64_t> pages = connection.readInteger("PRAGMA page_count");
   if (pages.failed()) return pages.error;
   if (pages.value == 0) {
-    if (auto error = connection.errorOf(connection.run("PRAGMA page_size=8192; PRAGMA auto_vacuum=INCREMENTAL"))) {
-      return error;
-    }
+    auto error = connection.errorOf(connection.run("PRAGMA page_size=8192; PRAGMA auto_vacuum=INCREMENTAL"));
+    if (error.failed()) return error;
   }
   const int code = connection.run(
       "PRAGMA journal_mode=WAL; PRAGMA synchronous=FULL;"
@@ -129,7 +130,7 @@ Status checkTables(Connection& connection, std::int64_t lastId, bool& made) {
       "WHERE name IN ('event_groups', 'recorder_losses', 'recorder_times') AND type = 'table'");
   if (notes.failed()) return notes.error;
   const bool hasState = !state.value.empty();
-  return hasState && notes.value == 3 ? std::nullopt : addNotes(connection, hasState);
+  return hasState && notes.value == 3 ? Status() : addNotes(connection, hasState);
 }
 
 Result<std::int64_t> readLastId(Connection& connection) {
