@@ -167,8 +167,10 @@ void LinuxPlatform::lookForTheEnd() {
   if (!clientsAreGone_ || connections_.ledger.connectionsOpen != 0 || loop_.queue()->ready() != 0) {
     return;
   }
-  std::exchange(clientsAreGone_, {})();
-  loop_.stop();
+  loop_.queue()->async([this, clientsAreGone = std::exchange(clientsAreGone_, {})]() mutable {
+    clientsAreGone();
+    loop_.stop();
+  });
 }
 
 // On a thread of its own, while the loop's may be stuck in somebody's work: only what any thread may do.

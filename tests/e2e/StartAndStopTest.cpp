@@ -17,12 +17,13 @@ namespace {
 class StartAndStop : public ServiceFixture {
  protected:
   // A session that runs, with that many different messages, over a connection that stays open.
-  std::unique_ptr<client::TarnReportingClient> sendMessages(int count) {
+  std::unique_ptr<client::TarnReportingClient> sendMessages(int count, std::int64_t reporterID = 1) {
     auto client = connect();
-    EXPECT_TRUE(client->call(client::createReportingSession(1)).ok());
-    EXPECT_EQ(client->send(client::startReportingSessionForID(1)), client::SendStatus::Sent);
+    EXPECT_TRUE(client->call(client::createReportingSession(reporterID)).ok());
+    EXPECT_EQ(client->send(client::startReportingSessionForID(reporterID)), client::SendStatus::Sent);
     for (int index = 0; index < count; ++index) {
-      EXPECT_TRUE(client->call(client::sendMessage({{"number", index}}, 4, 1, std::vector<std::int64_t>{1})).ok());
+      EXPECT_TRUE(
+          client->call(client::sendMessage({{"number", index}}, 4, 1, std::vector<std::int64_t>{reporterID})).ok());
     }
     return client;
   }
@@ -32,7 +33,7 @@ class StartAndStop : public ServiceFixture {
 TEST_F(StartAndStop, TermEndsEachClientInOrderCommitsEverythingAndExitsWith0) {
   ASSERT_TRUE(startService());
   const auto first = sendMessages(300);
-  const auto second = sendMessages(1);
+  const auto second = sendMessages(1, 2);
   EXPECT_EQ(stopService(SIGTERM), 0);
   EXPECT_EQ(recordedMessages(), 301U);
   const auto summaries = events("sys.oxbow.tarnkit.Session_Generic.Summary");
@@ -68,6 +69,7 @@ TEST_F(StartAndStop, TermStopsTheSingleMessageSession) {
   for (const Event& event : events()) {
     if (event.backend == "rtc") rtc.push_back(event.name);
   }
+  ASSERT_FALSE(rtc.empty());
   EXPECT_EQ(rtc.back(), "flush");
 }
 
