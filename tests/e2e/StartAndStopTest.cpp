@@ -72,6 +72,7 @@ TEST_F(StartAndStop, TermStopsTheSingleMessageSession) {
       rtc.push_back(event.name);
     }
   }
+  ASSERT_FALSE(rtc.empty());
   EXPECT_EQ(rtc.back(), "flush");
 }
 

@@ -2,6 +2,7 @@
 
 import argparse
 import os
+import shlex
 import shutil
 import socket
 import subprocess
@@ -84,7 +85,7 @@ class InstalledTree(unittest.TestCase):
         self.assertEqual(service["Type"], ["notify"])
         self.assertEqual(service["StateDirectory"], ["tarnreporting"])
         self.assertRegex(service["WatchdogSec"][0], r"^[1-9][0-9]*s$")
-        program, *arguments = service["ExecStart"][0].split()
+        program, *arguments = shlex.split(service["ExecStart"][0])
         self.assertEqual((os.path.isabs(program), os.path.basename(program)), (True, "tarnreportingd"))
         self.assertNotIn("@", " ".join(arguments))
         sockets = self.settings("lib/systemd/system/tarnreportingd.socket")
@@ -159,7 +160,7 @@ class StagedPackage(unittest.TestCase):
     def serve(self, stage, prefix):
         unit = f"{stage}{prefix}/lib/systemd/system/tarnreportingd.service"
         with open(unit, encoding="utf-8") as file:
-            command = next(line for line in file if line.startswith("ExecStart=")).split("=", 1)[1].split()
+            command = shlex.split(next(line for line in file if line.startswith("ExecStart=")).split("=", 1)[1])
         self.assertEqual(command[0], f"{prefix}/bin/tarnreportingd")
         path = stage + "/socket"
         with socket.socket(socket.AF_UNIX) as listener:
