@@ -415,7 +415,8 @@ void TarnReportingClientServerInstance::continueSending(Delivery& delivery) {
   if (!service) return;
   const auto giveWay = [&] {
     delivery.gaveWay = delivery.found;
-    continueLater([self = shared_from_this(), delivery = std::move(delivery)]() mutable { self->continueSending(delivery); });
+    continueLater(
+        [self = shared_from_this(), delivery = std::move(delivery)]() mutable { self->continueSending(delivery); });
   };
   delivery.found = delivery.found || service->findNextSessions(delivery.search);
   if (!delivery.found) {
@@ -461,7 +462,8 @@ void TarnReportingClientServerInstance::continueListing(Listing& listing) {
       return listing.reporters.size() % kListedAtOnce != 0 || !spend(1);
     });
     if (!whole) {
-      continueLater([self = shared_from_this(), listing = std::move(listing)]() mutable { self->continueListing(listing); });
+      continueLater(
+          [self = shared_from_this(), listing = std::move(listing)]() mutable { self->continueListing(listing); });
       return;
     }
   }
@@ -476,7 +478,8 @@ void TarnReportingClientServerInstance::endClient() {
   const bool isListed =
       std::any_of(clients.begin(), clients.end(), [&](const auto& client) { return client.get() == this; });
   if (!isListed) return;
-  if (const auto end = service->clientEnd(); end != TarnReportingClientEnd::ClientGone && !std::exchange(endTold_, true)) {
+  if (const auto end = service->clientEnd();
+      end != TarnReportingClientEnd::ClientGone && !std::exchange(endTold_, true)) {
     kLog(LogLevel::Default, "ending client %i. reason=%s", processIdentifier_, TarnReportingClientEndName(end));
   }
   const auto rest = [self = shared_from_this()] { self->endClient(); };
