@@ -95,10 +95,10 @@ Status EventFile::putOddCompanionsAside() {
     struct stat status {};
     if (::lstat(name.c_str(), &status) != 0 || S_ISREG(status.st_mode)) continue;
     const std::filesystem::path aside = freeName(suffix);
-    std::error_code error;
-    std::filesystem::rename(name, aside, error);
-    if (error.failed()) {
-      return Error{SQLITE_CANTOPEN, name + " is no regular file and can't be set aside: " + error.message()};
+    std::error_code failure;
+    std::filesystem::rename(name, aside, failure);
+    if (failure) {
+      return Error{SQLITE_CANTOPEN, name + " is no regular file and can't be set aside: " + failure.message()};
     }
     putAside_.push_back(aside.filename().string());
   }
@@ -250,17 +250,17 @@ std::filesystem::path EventFile::freeName(const std::string& suffix) const {
 
 Result<std::filesystem::path> EventFile::setAside() {
   const std::filesystem::path aside = freeName("");
-  std::error_code error;
-  std::filesystem::rename(path_, aside, error);
-  if (error.ok()) {
+  std::error_code failure;
+  std::filesystem::rename(path_, aside, failure);
+  if (!failure) {
     expected_ = 0;
   }
-  if (error.failed()) return {{}, Error{error.value(), "it can't be set aside: " + error.message()}};
+  if (failure) return {{}, Error{failure.value(), "it can't be set aside: " + failure.message()}};
   // The log and its index go along: what they hold belongs to the old file, and a fresh one must not find them.
   for (const char* const suffix : {"-wal", "-shm"}) {
-    std::filesystem::rename(path_.string() + suffix, aside.string() + suffix, error);
-    if (error.failed() && error != std::errc::no_such_file_or_directory) {
-      std::filesystem::remove(path_.string() + suffix, error);
+    std::filesystem::rename(path_.string() + suffix, aside.string() + suffix, failure);
+    if (failure && failure != std::errc::no_such_file_or_directory) {
+      std::filesystem::remove(path_.string() + suffix, failure);
     }
   }
   return {aside};
