@@ -94,7 +94,7 @@ TEST(Requests, StatusAnswersADictionary) {
 
 TEST(Requests, SettleIsAnsweredWithoutAResult) {
   Pair pair;
-  const auto seen = requestOf(pair, {}, [&](TarnReportingClient& client) { EXPECT_TRUE(client.call(settle()).ok()); });
+  const auto seen = requestOf(pair, {}, [&](ClientConnection& client) { EXPECT_TRUE(client.call(settle()).ok()); });
   EXPECT_EQ(seen.operation, Operation::Settle);
 }
 
