@@ -26,6 +26,7 @@ CAMPAIGNS = {
     "kills": ("kills", "SIGKILL at random moments under load: committed, settled and older messages are there, once"),
     "powercut": ("powercut", "writes that weren't synchronised are dropped: what was committed is there, once"),
     "clock": ("clocksteps", "the wall clock steps by days and years, across restarts: no row is removed"),
+    "fulldisk": ("fulldisk", "the disk is full and has room again: nothing is lost or doubled"),
     "restarts": ("restarts", "SIGTERM at random moments under load: all that was answered is there, once"),
 }
 
