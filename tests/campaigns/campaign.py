@@ -25,6 +25,7 @@ MOST_TOLD = 12
 CAMPAIGNS = {
     "kills": ("kills", "SIGKILL at random moments under load: committed, settled and older messages are there, once"),
     "syscalls": ("syscalls", "each system call of store, start and socket fails once or is short: the account closes"),
+    "allocations": ("allocations", "each allocation of twenty scenarios fails once: the service lives and serves"),
     "powercut": ("powercut", "writes that weren't synchronised are dropped: what was committed is there, once"),
     "clock": ("clocksteps", "the wall clock steps by days and years, across restarts: no row is removed"),
     "fulldisk": ("fulldisk", "the disk is full and has room again: nothing is lost or doubled"),
