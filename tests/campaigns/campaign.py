@@ -29,6 +29,7 @@ CAMPAIGNS = {
     "bits": ("bits", "flipped bits, cut, zeroed and swapped pages of every file: seen or harmless"),
     "powercut": ("powercut", "writes that weren't synchronised are dropped: what was committed is there, once"),
     "clock": ("clocksteps", "the wall clock steps by days and years, across restarts: no row is removed"),
+    "peers": ("peers", "hostile peers beside a polite client: its waits and losses, and the service's memory"),
     "fulldisk": ("fulldisk", "the disk is full and has room again: nothing is lost or doubled"),
     "restarts": ("restarts", "SIGTERM at random moments under load: all that was answered is there, once"),
 }
