@@ -6,10 +6,12 @@
 #include "tests/campaigns/shim/Control.h"
 
 // The C library's own names for what is interposed: looking them up would allocate.
+// NOLINTBEGIN(bugprone-reserved-identifier,readability-identifier-naming)
 extern "C" void* __libc_malloc(std::size_t);
 extern "C" void* __libc_calloc(std::size_t, std::size_t);
 extern "C" void* __libc_realloc(void*, std::size_t);
 extern "C" void* __libc_memalign(std::size_t, std::size_t);
+// NOLINTEND(bugprone-reserved-identifier,readability-identifier-naming)
 
 namespace tarn::campaigns {
 
