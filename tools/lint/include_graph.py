@@ -30,6 +30,8 @@ ROOMS = {
     "client/include/tarnkit": (),
     "client": ("plist", "wire", "client/include/tarnkit"),
     "client/tarnkit": ("plist", "wire", "client", "client/include/tarnkit"),
+    # What a client and the service share of a ring.
+    "clients/ring": (),
     "platform": VALUES,
     "service/vocabulary": BASE,
     "session": BASE + ("service/vocabulary",),
