@@ -30,8 +30,10 @@ ROOMS = {
     "client/include/tarnkit": (),
     "client": ("plist", "wire", "client/include/tarnkit"),
     "client/tarnkit": ("plist", "wire", "client", "client/include/tarnkit"),
-    # What a client and the service share of a ring.
+    # What a client and the service share of a ring; the C library, whose header stands on nothing.
     "clients/ring": (),
+    "clients/c/include": (),
+    "clients/c/src": ("clients/ring", "clients/c/include"),
     "platform": VALUES,
     "service/vocabulary": BASE,
     "session": BASE + ("service/vocabulary",),
