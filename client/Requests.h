@@ -63,4 +63,9 @@ inline Request status() {
   return wire::makeRequest<Operation::Status>();
 }
 
+// Answered when all that this connection sent before it is committed.
+inline Request settle() {
+  return wire::makeRequest<Operation::Settle>();
+}
+
 }  // namespace tarn::client

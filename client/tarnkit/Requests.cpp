@@ -62,4 +62,8 @@ Request status() {
   return Request(client::status());
 }
 
+Request settle() {
+  return Request(client::settle());
+}
+
 }  // namespace tarnkit

@@ -93,6 +93,12 @@ TEST(Requests, StatusAnswersADictionary) {
   EXPECT_EQ(seen.operation, Operation::Status);
 }
 
+TEST(Requests, SettleIsAnsweredWithoutAResult) {
+  Pair pair;
+  const auto seen = requestOf(pair, {}, [&](TarnReportingClient& client) { EXPECT_TRUE(client.call(settle()).ok()); });
+  EXPECT_EQ(seen.operation, Operation::Settle);
+}
+
 TEST(Requests, StartIsSentAndDoesNotWait) {
   Pair pair;
   EXPECT_EQ(pair.client->send(startReportingSessionForID(5)), SendStatus::Sent);

@@ -32,8 +32,15 @@ TEST(Operation, StatusIsNumber100) {
   EXPECT_EQ(operationFromName("status"), Operation::Status);
 }
 
+TEST(Operation, TheRingsOperationsAreNumbers102And103) {
+  EXPECT_EQ(operationFromNumber(102), Operation::OpenRing);
+  EXPECT_EQ(operationFromNumber(103), Operation::DeclareShape);
+  EXPECT_EQ(operationFromName("openRing"), Operation::OpenRing);
+  EXPECT_EQ(operationFromName("declareShape"), Operation::DeclareShape);
+}
+
 TEST(Operation, NumbersBesideTheListAreNoOperation) {
-  for (const std::uint64_t number : {0ULL, 12ULL, 99ULL, 101ULL, 256ULL + 1, 0xFFFFFFFFFFFFFFFFULL}) {
+  for (const std::uint64_t number : {0ULL, 12ULL, 99ULL, 104ULL, 256ULL + 1, 0xFFFFFFFFFFFFFFFFULL}) {
     EXPECT_FALSE(operationFromNumber(number).has_value()) << number;
   }
 }

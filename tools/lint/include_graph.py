@@ -17,7 +17,7 @@ WORKERS = ("derived",) + DIAGNOSTICS + TELEMETRY
 # The host's rooms stand on these two.
 GROUND = BASE + ("host/system", "host/log")
 HOST = ("host/system", "host/log", "host/loop", "host/socket", "host/settings", "host/machine", "host/drivers",
-        "host/traces", "host/traces/analysis")
+        "host/ring", "host/traces", "host/traces/analysis")
 PROGRAM = SESSION + WORKERS + ("service", "wire", "recorder", "recorder/store") + HOST + ("host",)
 
 # Each folder, from the ground up, and what its files may include beside files of its own. The worker families don't
@@ -44,7 +44,8 @@ ROOMS = {
     "host/system": BASE,
     "host/log": BASE + ("host/system",),
     "host/loop": GROUND,
-    "host/socket": GROUND + ("host/loop", "wire"),
+    "host/ring": GROUND + ("host/loop", "wire", "clients/ring"),
+    "host/socket": GROUND + ("host/loop", "host/ring", "wire"),
     "host/settings": GROUND + ("host/loop", "host/socket", "recorder"),
     "host/machine": GROUND + ("wire",),
     "host/drivers": GROUND,

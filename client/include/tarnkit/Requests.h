@@ -47,5 +47,7 @@ Request getAllReporters();
 Request killService();
 // Answers the service's counters and levels.
 Request status();
+// Answered when all that this connection sent before it is on the disk.
+Request settle();
 
 }  // namespace tarnkit
