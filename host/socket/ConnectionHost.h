@@ -5,6 +5,7 @@
 #pragma once
 
 #include "host/loop/MainLoop.h"
+#include "host/ring/RingBoard.h"
 #include "host/socket/ConnectionGate.h"
 #include "host/socket/HostLimits.h"
 #include "host/socket/Ledger.h"
@@ -20,7 +21,11 @@ class ConnectionHost {
 
   // Loop and log outlive the host, and the loop runs no more when the host ends.
   ConnectionHost(MainLoop& mainLoop, platform::Log& logSink, const HostLimits& hostLimits = {})
-      : loop(mainLoop), log(logSink), limits(hostLimits), gate(mainLoop, hostLimits.maxQueuedWork) {
+      : loop(mainLoop),
+        log(logSink),
+        limits(hostLimits),
+        gate(mainLoop, hostLimits.maxQueuedWork),
+        rings(mainLoop, logSink) {
     loop.addTurnHook([this] { gate.releaseHeld(); });
   }
   ConnectionHost(const ConnectionHost&) = delete;
@@ -28,7 +33,11 @@ class ConnectionHost {
 
   // The answer to `status`; without one it is the ledger alone.
   void setStatusSource(StatusSource source) { status_ = std::move(source); }
-  plist::Dictionary status() { return status_ ? status_() : ledger.status(0, loop.queue()->waiting(), {}); }
+  plist::Dictionary status() {
+    plist::Dictionary answer = status_ ? status_() : ledger.status(0, loop.queue()->waiting(), {});
+    rings.counts.describe(answer);
+    return answer;
+  }
 
   // Tells that the pause source's answer changed. Threads: any.
   void resumeRequests() { loop.queue()->wake(); }
@@ -38,6 +47,7 @@ class ConnectionHost {
   const HostLimits limits;
   Ledger ledger;
   ConnectionGate gate;
+  RingBoard rings;
   // One for all connections: it keeps nothing between frames but scratch space and the key lists seen lately.
   wire::RequestDecoder decoder;
   wire::DecodedRequest request;

@@ -7,6 +7,7 @@
 #include <cerrno>
 
 #include "host/log/HostLog.h"
+#include "host/ring/ReceivedDescriptors.h"
 #include "wire/Encoder.h"
 
 namespace tarn::linux_host {
@@ -88,7 +89,7 @@ void SocketConnection::handleEvents(std::uint32_t events) {
 void SocketConnection::receive() {
   const auto space = frames_.space();
   const auto size = std::min(space.size(), host_.limits.gulpBytes);
-  const ssize_t bytes = ::recv(socket_.get(), space.data(), size, MSG_DONTWAIT);
+  const ssize_t bytes = receiveWithDescriptors(socket_.get(), space.first(size), descriptors_);
   if (bytes > 0) {
     frames_.received(static_cast<std::size_t>(bytes));
     serveFrames();
@@ -140,6 +141,8 @@ void SocketConnection::serveRequest(wire::DecodedRequest& request) {
   if (request.operation == wire::Operation::Status) {
     // At once: whoever asks how the service is must not wait for its work.
     sendReply(request.id, {host_.status()});
+  } else if (wire::rowOf(request.operation).servedBy == wire::ServedBy::Host) {
+    serveRingOperation(request);
   } else if (!host_.gate.open()) {
     heldRequest_ = std::move(request);
     host_.gate.hold(shared_from_this());
@@ -149,6 +152,44 @@ void SocketConnection::serveRequest(wire::DecodedRequest& request) {
     }
     dispatchRequest(request, *object_, weak_from_this());
   }
+}
+
+void SocketConnection::serveRingOperation(const wire::DecodedRequest& request) {
+  if (rings_ == nullptr) {
+    rings_ = host_.rings.connect(weak_from_this());
+  }
+  wire::ErrorCode code = wire::ErrorCode::BadArguments;
+  std::string wrong;
+  if (request.operation == wire::Operation::OpenRing) {
+    const ConnectionRings::Opened opened = rings_->open(std::exchange(descriptors_, {}));
+    wrong = opened.error;
+    if (wrong.empty()) {
+      sendReply(request.id, {opened.number});
+    }
+  } else if (request.operation == wire::Operation::DeclareShape) {
+    wrong = rings_->declareShape(request.dictionary);
+    if (wrong.empty()) {
+      sendReply(request.id, {true});
+    }
+  } else {
+    code = wire::ErrorCode::UnknownOperation;
+    wrong = "unknown operation";
+  }
+  if (!wrong.empty()) {
+    host_.ledger.countRefusal(code);
+    sendError(request.id, {wire::kErrorDomain, static_cast<std::int64_t>(code), wrong});
+  }
+}
+
+void SocketConnection::serveRingRequest(wire::DecodedRequest& request) {
+  if (request.operation == wire::Operation::SendMessage) {
+    ++host_.ledger.messagesReceived;
+  }
+  dispatchRequest(request, *object_, {});
+}
+
+void SocketConnection::afterRingRequests(platform::Work work) {
+  host_.loop.queue()->async(std::move(work));
 }
 
 void SocketConnection::goOn() {
@@ -288,7 +329,14 @@ void SocketConnection::beginEnd(bool interrupted) {
     dropOutput();
     socket_.reset();
   }
-  host_.loop.queue()->async([self, interrupted] { self->finish(interrupted); });
+  const auto ended = [self, interrupted] {
+    self->host_.loop.queue()->async([self, interrupted] { self->finish(interrupted); });
+  };
+  if (rings_ != nullptr) {
+    rings_->end(ended);  // what was posted is served before the sessions stop
+  } else {
+    ended();
+  }
 }
 
 void SocketConnection::finish(bool interrupted) {
@@ -304,6 +352,7 @@ void SocketConnection::finish(bool interrupted) {
     handler();
   }
   object_.reset();
+  rings_.reset();
 }
 
 }  // namespace tarn::linux_host

@@ -15,6 +15,7 @@
 #include <optional>
 #include <string>
 
+#include "host/ring/ConnectionRings.h"
 #include "host/socket/ConnectionHost.h"
 #include "host/socket/RequestDispatcher.h"
 #include "host/system/UniqueDescriptor.h"
@@ -27,6 +28,7 @@ class SocketConnection final : public platform::Connection,
                                public EventHandler,
                                public HeldConnection,
                                public ReplySink,
+                               public RingOwner,
                                public std::enable_shared_from_this<SocketConnection> {
  public:
   // Takes over a connected socket that doesn't block. `number` names it in logs. The host outlives the connection.
@@ -51,6 +53,10 @@ class SocketConnection final : public platform::Connection,
   void sendError(std::uint64_t id, const platform::RemoteError& error) override;
   void dropReply() override { ++host_.ledger.repliesDropped; }
 
+  bool takesRingRequests() override { return object_ != nullptr && host_.gate.open(); }
+  void serveRingRequest(wire::DecodedRequest& request) override;
+  void afterRingRequests(platform::Work work) override;
+
  private:
   enum class State : std::uint8_t {
     Fresh,   // not resumed yet
@@ -64,6 +70,7 @@ class SocketConnection final : public platform::Connection,
   void serveFrames();
   void serveFrame(std::span<const std::byte> frame);
   void serveRequest(wire::DecodedRequest& request);
+  void serveRingOperation(const wire::DecodedRequest& request);
 
   // Whether a reply can still be sent; counts it as dropped when not.
   bool takesReplies() noexcept;
@@ -89,6 +96,8 @@ class SocketConnection final : public platform::Connection,
   Handler invalidationHandler_;
 
   wire::FrameBuffer frames_;
+  std::vector<UniqueDescriptor> descriptors_;        // that came last, for openRing
+  std::shared_ptr<ConnectionRings> rings_;           // once it has any
   std::optional<wire::DecodedRequest> heldRequest_;  // the head request while the gate is shut
   std::uint32_t watchedEvents_ = 0;                  // 0: not watched at all
 
