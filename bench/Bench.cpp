@@ -25,6 +25,7 @@ constexpr Figure kFigures[] = {
     {"stream", &measureStream},
     {"gathered", &measureGathered},
     {"recorded", &measureRecorded},
+    {"post", &measurePost},
     {"decoding", &measureDecoding},
     {"memory", &measureMemory},
     {"equality", &measureEquality},

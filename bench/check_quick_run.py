@@ -25,6 +25,8 @@ ROWS = [
     ("both events recorded, old ones expiring (32 MB)", ("SQLite alone",)),
     ("processor time a message, both events recorded", ("",)),
     ("processor time a message, old ones expiring", ("",)),
+    ("messages through a ring, nothing wanted", ("",)),
+    ("processor time a message through a ring, nothing wanted", ("",)),
     ("decoding a message, to views", ("bare walk",)),
     ("decoding a request, to a finished dictionary", ("bare walk", "nlohmann")),
     ("encoding a message", ("",)),
@@ -52,6 +54,10 @@ ROWS = [
     ("resident bytes a live session", ("",)),
     ("evaluation of a trace, processor time", ("by the clock",)),
 ]
+for part in ("median", "p99.9", "worst"):
+    ROWS.append((f"post of a message, service alive, {part}", ("bare copy",)))
+    ROWS.append((f"post of a message, service stopped, {part}", ("bare copy",)))
+    ROWS.append((f"the clock around each of them, {part}", ("",)))
 for kind in ("ordinary", "merging pairs", "ending segments", "ordinary, summary file"):
     ROWS.append((f"stop of 10^3 messages, {kind}, a message", ("in all",)))
     ROWS.append((f"stop of 10^4 messages, {kind}, a message", ("in all",)))

@@ -88,6 +88,10 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
   // What comes in is held up while what it becomes piles up.
   recorder_.setRoomHandler([this] { connections_.resumeRequests(); });
   workQueues_.setRoomHandler([this] { connections_.resumeRequests(); });
+  connections_.rings.setCommitSource([this] {
+    const recorder::RecorderCounters counters = recorder_.counters();
+    return CommitPoint{counters.handedOver, counters.committed, workQueues_.unfinished() == 0};
+  });
   connections_.gate.setPauseSource([this] { return recorder_.isFull() || workQueues_.isFull(); });
   loop_.addTurnHook([this] { lookForTheEnd(); });
   if (recorderEnabled_) {

@@ -86,6 +86,18 @@ std::optional<Dictionary> PackedBuilder::finishDictionary(KeyListCache& cache) {
   return Dictionary(body);
 }
 
+Dictionary PackedBuilder::finishDictionary(const KeyList& keys) {
+  if (keys.empty()) {
+    dropLevel();
+    return {};
+  }
+  KeyList list = keys;
+  detail::Body* body = takeBody();
+  body->keys = std::exchange(list.body_, nullptr);
+  levels_.pop_back();
+  return Dictionary(body);
+}
+
 Array PackedBuilder::finishArray() {
   if (levels_.back().count == 0) {
     dropLevel();

@@ -43,6 +43,8 @@ class PackedBuilder {
   void add(const ValueView& value);
   // Closes the open container. A dictionary with a key given twice yields nothing.
   std::optional<Dictionary> finishDictionary(KeyListCache& cache);
+  // The same for values that were added without their keys, one for each of `keys` and in their order.
+  Dictionary finishDictionary(const KeyList& keys);
   Array finishArray();
   // Drops everything that is open.
   void reset() noexcept;

@@ -30,10 +30,21 @@ enum class Operation : std::uint8_t {
   KillService,
   Status = 100,
   Settle,
+  OpenRing,
+  DeclareShape,
 };
 
 // What follows the operation in a request. Names, kinds and places stand in kArguments (Request.h).
-enum class Argument : std::uint8_t { ReporterID, ServiceType, Configuration, Message, Category, Type, ReporterIDs };
+enum class Argument : std::uint8_t {
+  ReporterID,
+  ServiceType,
+  Configuration,
+  Message,
+  Category,
+  Type,
+  ReporterIDs,
+  Shape
+};
 
 // What a reply carries when all went well.
 enum class Result : std::uint8_t {
@@ -99,6 +110,8 @@ inline constexpr std::array kOperations = {
     OperationRow{Operation::KillService, "killService", {}, Result::NoReply},
     OperationRow{Operation::Status, "status", {}, Result::Dictionary, ServedBy::Host},
     OperationRow{Operation::Settle, "settle", {}, Result::Nothing, ServedBy::Host},
+    OperationRow{Operation::OpenRing, "openRing", {}, Result::Number, ServedBy::Host},
+    OperationRow{Operation::DeclareShape, "declareShape", {Argument::Shape}, Result::True, ServedBy::Host},
 };
 
 // The numbers from here up are the host's own.

@@ -56,6 +56,7 @@ inline constexpr std::array kArguments = {
     ArgumentRow{Argument::Type, "type", "type: 0 to 65535 expected", &Request::type},
     ArgumentRow{Argument::ReporterIDs, "reporterIDs",
                 "reporter IDs: an array of signed 64-bit integers or null expected", &Request::reporterIDs},
+    ArgumentRow{Argument::Shape, "shape", "a dictionary expected", &Request::dictionary},
 };
 static_assert(std::all_of(kArguments.begin(), kArguments.end(), [](const ArgumentRow& row) {
   return &row == &kArguments[static_cast<std::size_t>(row.argument)];

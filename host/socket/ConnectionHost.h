@@ -8,6 +8,7 @@
 #include <utility>
 
 #include "host/loop/MainLoop.h"
+#include "host/ring/RingBoard.h"
 #include "host/socket/ConnectionGate.h"
 #include "host/socket/FairShares.h"
 #include "host/socket/HalfFrames.h"
@@ -39,7 +40,8 @@ class ConnectionHost {
         log(logSink),
         limits(hostLimits),
         gate(mainLoop, hostLimits.maxQueuedWork),
-        halfFrames(hostLimits.halfFrameTime, hostLimits.quotas.waitingBytes) {
+        halfFrames(hostLimits.halfFrameTime, hostLimits.quotas.waitingBytes),
+        rings(mainLoop, logSink) {
     loop.queue()->setPauseSource([this] { return !gate.open(); });
     loop.addTurnHook([this] { serveShares(); });
   }
@@ -48,7 +50,11 @@ class ConnectionHost {
 
   // The answer to `status`; without one it is the ledger alone.
   void setStatusSource(StatusSource source) { status_ = std::move(source); }
-  plist::Dictionary status() { return status_ ? status_() : ledger.status(0, loop.queue()->waiting(), {}); }
+  plist::Dictionary status() {
+    plist::Dictionary answer = status_ ? status_() : ledger.status(0, loop.queue()->waiting(), {});
+    rings.counts.describe(answer);
+    return answer;
+  }
 
   // Connections note themselves while they are open.
   void add(OpenConnection& connection) { open_.insert(&connection); }
@@ -99,6 +105,7 @@ class ConnectionHost {
   ConnectionGate gate;
   FairShares shares;
   HalfFrames halfFrames;
+  RingBoard rings;
   // One for all connections: it keeps nothing between frames but scratch space and the key lists seen lately.
   wire::RequestDecoder decoder;
   wire::DecodedRequest request;

@@ -8,6 +8,7 @@
 
 #include "host/log/LogFloodGuard.h"
 #include "host/log/PrefixedLog.h"
+#include "host/ring/ReceivedDescriptors.h"
 #include "host/socket/Quotas.h"
 #include "wire/Encoder.h"
 
@@ -122,7 +123,7 @@ void SocketConnection::stopAtHead(std::uint32_t events) {
 bool SocketConnection::receive() {
   const auto space = frames_.space();
   const auto size = std::min(space.size(), host_.limits.gulpBytes);
-  const ssize_t bytes = ::recv(socket_.get(), space.data(), size, MSG_DONTWAIT);
+  const ssize_t bytes = receiveWithDescriptors(socket_.get(), space.first(size), descriptors_);
   if (bytes > 0) {
     inputWaits_ = static_cast<std::size_t>(bytes) == size;
     frames_.received(static_cast<std::size_t>(bytes));
@@ -259,6 +260,11 @@ void SocketConnection::serveRequest(wire::DecodedRequest& request, std::size_t f
     refuseRequest(request.id, refusal_);
     return;
   }
+  if (request.operation == wire::Operation::OpenRing || request.operation == wire::Operation::DeclareShape) {
+    lane_.spend(costOf(request, frameBytes));
+    serveRingOperation(request);
+    return;
+  }
   if (!host_.gate.open()) {
     hold(request, frameBytes);
     return;
@@ -328,6 +334,48 @@ void SocketConnection::refuseRequest(std::uint64_t id, const std::string& why) {
   lane_.spend(1);
   host_.ledger.countRefusal(wire::ErrorCode::OverQuota);
   sendError(id, {wire::kErrorDomain, static_cast<std::int64_t>(wire::ErrorCode::OverQuota), why});
+}
+
+void SocketConnection::serveRingOperation(const wire::DecodedRequest& request) {
+  if (rings_ == nullptr) {
+    rings_ = host_.rings.connect(weak_from_this());
+  }
+  wire::ErrorCode code = wire::ErrorCode::BadArguments;
+  std::string wrong;
+  if (request.operation == wire::Operation::OpenRing) {
+    const ConnectionRings::Opened opened = rings_->open(std::exchange(descriptors_, {}));
+    wrong = opened.error;
+    if (wrong.empty()) {
+      sendReply(request.id, {opened.number});
+    }
+  } else if (request.operation == wire::Operation::DeclareShape) {
+    wrong = rings_->declareShape(request.dictionary);
+    if (wrong.empty()) {
+      sendReply(request.id, {true});
+    }
+  } else {
+    code = wire::ErrorCode::UnknownOperation;
+    wrong = "unknown operation";
+  }
+  if (!wrong.empty()) {
+    host_.ledger.countRefusal(code);
+    sendError(request.id, {wire::kErrorDomain, static_cast<std::int64_t>(code), wrong});
+  }
+}
+
+// In the connection's own line, behind what it sent over the socket before.
+void SocketConnection::serveRingRequest(wire::DecodedRequest& request) {
+  if (request.operation == wire::Operation::SendMessage) {
+    ++host_.ledger.messagesReceived;
+  }
+  const WorkLane::Scope scope(&lane_);
+  dispatchRequest(request, *object_, {});
+  host_.shares.ready(self());
+}
+
+void SocketConnection::afterRingRequests(platform::Work work) {
+  host_.loop.queue()->asyncIn(lane_, std::move(work));
+  host_.shares.ready(self());
 }
 
 // The socket then yields what came before and its end, in this order.
@@ -470,9 +518,17 @@ void SocketConnection::beginEnd(bool interrupted) {
     dropOutput();
     socket_.reset();
   }
-  // Run by takeTurn(), while this lives.
-  host_.loop.queue()->asyncIn(lane_, [this, interrupted] { finish(interrupted); });
-  host_.shares.ready(self());
+  const auto ended = [connection = shared_from_this(), interrupted] {
+    // Run by takeTurn(), while the connection lives.
+    connection->host_.loop.queue()->asyncIn(connection->lane_,
+                                            [ending = connection.get(), interrupted] { ending->finish(interrupted); });
+    connection->host_.shares.ready(connection);
+  };
+  if (rings_ != nullptr) {
+    rings_->end(ended);  // what was posted is served before the sessions stop
+  } else {
+    ended();
+  }
 }
 
 void SocketConnection::finish(bool interrupted) {
@@ -489,6 +545,7 @@ void SocketConnection::finish(bool interrupted) {
     handler();
   }
   object_.reset();
+  rings_.reset();
   countSessions();
   --party().connections;
 }

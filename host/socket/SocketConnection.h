@@ -18,6 +18,7 @@
 #include <string>
 
 #include "host/log/LogClient.h"
+#include "host/ring/ConnectionRings.h"
 #include "host/socket/ConnectionHost.h"
 #include "host/socket/RequestDispatcher.h"
 #include "host/system/UniqueDescriptor.h"
@@ -32,6 +33,7 @@ class SocketConnection final : public platform::Connection,
                                public ShareHolder,
                                public HalfFrames::Holder,
                                public ReplySink,
+                               public RingOwner,
                                public std::enable_shared_from_this<SocketConnection> {
  public:
   // Takes over a connected socket that doesn't block. `number` names it in logs, from 1. The host outlives the
@@ -66,6 +68,10 @@ class SocketConnection final : public platform::Connection,
   void sendError(std::uint64_t id, const platform::RemoteError& error) override;
   void dropReply() override { ++host_.ledger.repliesDropped; }
 
+  bool takesRingRequests() override { return object_ != nullptr && host_.gate.open(); }
+  void serveRingRequest(wire::DecodedRequest& request) override;
+  void afterRingRequests(platform::Work work) override;
+
  private:
   enum class State : std::uint8_t {
     Fresh,   // not resumed yet
@@ -93,6 +99,7 @@ class SocketConnection final : public platform::Connection,
   void countWaitingBytes(std::size_t half);
   // While the gate is shut: answers `status` and stops at the first other request.
   void stopAtHead(std::uint32_t events);
+  void serveRingOperation(const wire::DecodedRequest& request);
 
   // Whether a reply can still be sent; counts it as dropped when not.
   bool takesReplies() noexcept;
@@ -121,6 +128,8 @@ class SocketConnection final : public platform::Connection,
   bool inputWaits_ = false;  // the socket may have bytes
   bool peerGone_ = false;    // nobody will read a reply
   WorkLane lane_;
+  std::vector<UniqueDescriptor> descriptors_;        // that came last, for openRing
+  std::shared_ptr<ConnectionRings> rings_;           // once it has any
   std::optional<wire::DecodedRequest> heldRequest_;  // the head request while the gate is shut
   std::size_t heldBytes_ = 0;                        // of its frame
   std::string refusal_;                              // the answer to every request; empty: they are served

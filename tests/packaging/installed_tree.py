@@ -20,9 +20,10 @@ FILES = (
 )
 # All of them: what isn't here is nobody else's.
 HEADERS = {"include/tarnkit/" + name for name in ("Options.h", "Reply.h", "Requests.h", "TarnReportingClient.h",
-                                                  "Value.h")}
+                                                  "Value.h")} | {"include/tarnreporting.h", "include/tarnreporting.hpp"}
 LIBRARIES = ("libtarn_client.a", "libtarn_wire.a", "libtarn_plist.a", "cmake/tarnkit/tarnkit-config.cmake",
-             "cmake/tarnkit/tarnkit-config-version.cmake")
+             "cmake/tarnkit/tarnkit-config-version.cmake", "libtarnreporting.so.1",
+             "cmake/tarnreporting/tarnreporting-config.cmake", "pkgconfig/tarnreporting.pc")
 
 options = argparse.Namespace()
 

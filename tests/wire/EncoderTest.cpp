@@ -113,7 +113,7 @@ TEST(Encoder, EveryRequestDecodesToWhatItWas) {
   request.type = 2;
   request.reporterID = -5;
   request.reporterIDs = std::vector<std::int64_t>{9, -9};
-  for (std::uint64_t number = 1; number <= 100; number = number == 11 ? 100 : number + 1) {
+  for (std::uint64_t number = 1; number <= 103; number = number == 11 ? 100 : number + 1) {
     request.operation = operationFromNumber(number).value();
     std::string out;
     Encoder(out).request(number, request);

@@ -39,8 +39,15 @@ TEST(Operation, SettleIsNumber101AndTheHostsOwn) {
   EXPECT_EQ(rowOf(Operation::Settle).arguments.size(), 0U);
 }
 
+TEST(Operation, TheRingsOperationsAreNumbers102And103) {
+  EXPECT_EQ(operationFromNumber(102), Operation::OpenRing);
+  EXPECT_EQ(operationFromNumber(103), Operation::DeclareShape);
+  EXPECT_EQ(operationFromName("openRing"), Operation::OpenRing);
+  EXPECT_EQ(operationFromName("declareShape"), Operation::DeclareShape);
+}
+
 TEST(Operation, NumbersBesideTheListAreNoOperation) {
-  for (const std::uint64_t number : {0ULL, 12ULL, 99ULL, 102ULL, 256ULL + 1, 0xFFFFFFFFFFFFFFFFULL}) {
+  for (const std::uint64_t number : {0ULL, 12ULL, 99ULL, 104ULL, 256ULL + 1, 0xFFFFFFFFFFFFFFFFULL}) {
     EXPECT_FALSE(operationFromNumber(number).has_value()) << number;
   }
 }

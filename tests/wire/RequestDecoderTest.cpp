@@ -144,7 +144,7 @@ TEST(RequestDecoder, AnOpenEndedFrameIsAsGoodAsOneOfKnownLength) {
 // Answered with code 1.
 
 TEST(RequestDecoder, UnknownOperationsAreAnsweredWithTheirID) {
-  for (const char* number : {"00", "0c", "1863", "1866", "1bffffffffffffffff", "20", "6161", "f6", "80"}) {
+  for (const char* number : {"00", "0c", "1863", "1868", "1bffffffffffffffff", "20", "6161", "f6", "80"}) {
     const Decoded decoded = decodeHex(std::string("831864") + number + "01");
     EXPECT_EQ(decoded.code(), 1) << number;
     EXPECT_EQ(decoded.request.id, 100U);

@@ -9,10 +9,11 @@ from dataclasses import dataclass
 
 from tree import Finding, code_only, matches
 
-HOST = ("host/*", "recorder/*", "service/main.cpp", "tools/*", "client/*")
+HOST = ("host/*", "recorder/*", "service/main.cpp", "tools/*", "client/*", "clients/*")
 TRIALS = ("tests/*", "bench/*", "fuzz/*")
 # Where time is the real one: real programs, the real machine's folders, and two adapters that have nothing to wait on.
 REAL_TIME = ("tests/e2e/*", "tests/scenario/*", "tests/host/*", "tests/recorder/*", "tests/client/*",
+             "tests/clients/*", "clients/c/src/Client.cpp",
              "tests/*Stress*", "bench/*", "tools/*", "host/system/FileLock.cpp", "recorder/store/EventReader.cpp")
 # A fatal check on our own mistakes, where there is no log yet or no longer.
 LAST_WORDS = ("service/vocabulary/ProcessState.cpp", "service/vocabulary/TarnReportingServerQueue.cpp",
@@ -71,7 +72,8 @@ BANS = (
         "std::make_unique or std::make_shared"),
     Ban(r"(?<!operator)(?<!operator )(?<!=)(?<!= )\bdelete\b", ("plist/*", "platform/UniqueFunction.h"),
         "a type that owns"),
-    Ban(call("malloc|calloc|realloc|free"), ("plist/*", "bench/*"), "a container"),
+    # The C library stands on the C library: the C++ runtime would end the process where memory runs out.
+    Ban(call("malloc|calloc|realloc|free"), ("plist/*", "bench/*", "clients/c/src/*"), "a container"),
     Ban(r"\bstd::(?:thread|async|jthread)\b(?!::id)", (*HOST, *TRIALS, "testing/*"), "platform::WorkQueues"),
     Ban(r"\b(?:(?:const|mutable|static)\s+)*std::(?:(?:recursive_)?mutex|lock_guard|unique_lock|scoped_lock)\b",
         UNCHECKED_LOCKS, "Mutex and MutexLock of plist/ThreadSafety.h, whose use clang checks"),

@@ -17,7 +17,7 @@ WORKERS = ("derived",) + DIAGNOSTICS + TELEMETRY
 # The host's rooms stand on these two.
 GROUND = BASE + ("host/system", "host/log")
 HOST = ("host/system", "host/log", "host/loop", "host/socket", "host/settings", "host/machine", "host/drivers",
-        "host/traces", "host/traces/analysis")
+        "host/ring", "host/traces", "host/traces/analysis")
 PROGRAM = SESSION + WORKERS + ("service", "wire", "recorder", "recorder/store") + HOST + ("host",)
 
 # Each folder, from the ground up, and what its files may include beside files of its own. The worker families don't
@@ -30,6 +30,10 @@ ROOMS = {
     "client/include/tarnkit": (),
     "client": ("plist", "wire", "client/include/tarnkit"),
     "client/tarnkit": ("plist", "wire", "client", "client/include/tarnkit"),
+    # What a client and the service share of a ring; the C library, whose header stands on nothing.
+    "clients/ring": (),
+    "clients/c/include": (),
+    "clients/c/src": ("clients/ring", "clients/c/include"),
     "platform": VALUES,
     "service/vocabulary": BASE,
     "session": BASE + ("service/vocabulary",),
@@ -40,7 +44,8 @@ ROOMS = {
     "host/system": BASE,
     "host/log": BASE + ("host/system",),
     "host/loop": GROUND,
-    "host/socket": GROUND + ("host/loop", "wire"),
+    "host/ring": GROUND + ("host/loop", "wire", "clients/ring"),
+    "host/socket": GROUND + ("host/loop", "host/ring", "wire"),
     "host/settings": GROUND + ("host/loop", "host/socket", "recorder"),
     "host/machine": GROUND + ("wire",),
     "host/drivers": GROUND,

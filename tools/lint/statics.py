@@ -10,8 +10,8 @@ import re
 from tree import Finding, code_only
 
 HOME = "service/vocabulary/ProcessState.cpp"
-PRODUCT = ("client/", "derived/", "diagnostics/", "host/", "platform/", "plist/", "recorder/", "service/", "session/",
-           "telemetry/", "testing/", "tools/ctl/", "tools/script/", "wire/")
+PRODUCT = ("client/", "clients/", "derived/", "diagnostics/", "host/", "platform/", "plist/", "recorder/", "service/",
+           "session/", "telemetry/", "testing/", "tools/ctl/", "tools/script/", "wire/")
 # (file, variable): why it can't live in the home.
 EXCEPTIONS = {
     ("plist/Key.cpp", "instance"): "one copy of each text that never changes; keys are made before main",
@@ -19,6 +19,8 @@ EXCEPTIONS = {
     ("tools/ctl/EventsCommand.cpp", "stopRequested"): "a signal handler reaches nothing else",
     ("recorder/store/MappedGuard.cpp", "guarded"): "a signal handler reaches nothing else",
     ("recorder/store/MappedGuard.cpp", "once"): "the handler is installed once a process",
+    **{("clients/c/src/Forks.cpp", name): "fork() happens to the whole process that loaded the library"
+       for name in ("mutex", "once", "first")},
     ("host/loop/CurrentQueue.h", "current_"): "which queue a thread serves belongs to the thread",
     ("host/log/LogClient.h", "current_"): "for whom a thread works belongs to the thread",
     ("host/loop/WorkLane.h", "current_"): "and so does whose work of it that is",

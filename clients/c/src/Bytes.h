@@ -1,0 +1,75 @@
+// Bytes: a text or a frame that grows. Without the C++ runtime, and so without exceptions: when memory runs out it is
+// marked as failed, and what is appended from then on is left out. Threads: one at a time.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <cstdlib>
+#include <cstring>
+
+namespace tarn::reporting {
+
+class Bytes {
+ public:
+  Bytes() = default;
+  Bytes(const Bytes&) = delete;
+  Bytes& operator=(const Bytes&) = delete;
+  ~Bytes() { std::free(data_); }
+
+  const std::uint8_t* data() const noexcept { return data_; }
+  std::size_t size() const noexcept { return size_; }
+  bool failed() const noexcept { return failed_; }
+  void clear() noexcept {
+    size_ = 0;
+    failed_ = false;
+  }
+  void release() noexcept {
+    std::free(data_);
+    data_ = nullptr;
+    size_ = capacity_ = 0;
+    failed_ = false;
+  }
+
+  void append(const void* bytes, std::size_t count) noexcept {
+    if (count != 0 && reserve(count)) {
+      std::memcpy(data_ + size_, bytes, count);
+      size_ += count;
+    }
+  }
+  void append(const Bytes& other) noexcept { append(other.data(), other.size()); }
+  void append(std::uint8_t byte) noexcept { append(&byte, 1); }
+  // Drops so many bytes from the front.
+  void dropFront(std::size_t count) noexcept {
+    std::memmove(data_, data_ + count, size_ - count);
+    size_ -= count;
+  }
+  // Room for so many more bytes behind the others; null when there is no memory. They count once grow() says so.
+  std::uint8_t* room(std::size_t count) noexcept { return reserve(count) ? data_ + size_ : nullptr; }
+  void grow(std::size_t count) noexcept { size_ += count; }
+  void overwrite(std::size_t at, const void* bytes, std::size_t count) noexcept {
+    if (!failed_) {
+      std::memcpy(data_ + at, bytes, count);
+    }
+  }
+
+ private:
+  bool reserve(std::size_t count) noexcept {
+    if (failed_ || capacity_ - size_ >= count) return !failed_;
+    const std::size_t wanted = (size_ + count) * 2;
+    auto* const moved = static_cast<std::uint8_t*>(std::realloc(data_, wanted));
+    if (moved == nullptr) {
+      failed_ = true;
+      return false;
+    }
+    data_ = moved;
+    capacity_ = wanted;
+    return true;
+  }
+
+  std::uint8_t* data_ = nullptr;
+  std::size_t size_ = 0;
+  std::size_t capacity_ = 0;
+  bool failed_ = false;
+};
+
+}  // namespace tarn::reporting

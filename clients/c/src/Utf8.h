@@ -1,0 +1,48 @@
+// Whether a text is UTF-8: no stray byte, no overlong form, no surrogate, nothing over U+10FFFF. Bounded by the text's
+// length, and eight bytes at a time where they are ASCII. Stateless. Threads: any.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+
+namespace tarn::reporting {
+
+// Bytes of the well-formed character at the front; 0 when there is none.
+inline std::size_t characterLength(const unsigned char* at, std::size_t left) noexcept {
+  const unsigned first = at[0];
+  if (first < 0x80) return 1;
+  const std::size_t length = first >= 0xF0 ? 4 : first >= 0xE0 ? 3 : 2;
+  if (first < 0xC2 || first > 0xF4 || left < length) return 0;
+  // The second byte has a narrower range after some first ones.
+  const unsigned least = first == 0xE0 ? 0xA0 : first == 0xF0 ? 0x90 : 0x80;
+  const unsigned most = first == 0xED ? 0x9F : first == 0xF4 ? 0x8F : 0xBF;
+  if (at[1] < least || at[1] > most) return 0;
+  for (std::size_t i = 2; i < length; ++i) {
+    if ((at[i] & 0xC0U) != 0x80) return 0;
+  }
+  return length;
+}
+
+inline bool isUtf8(const char* text, std::size_t length) noexcept {
+  const auto* at = reinterpret_cast<const unsigned char*>(text);
+  std::size_t left = length;
+  while (left != 0) {
+    std::uint64_t word = 0;
+    if (left >= sizeof word) {
+      std::memcpy(&word, at, sizeof word);
+      if ((word & 0x8080808080808080U) == 0) {
+        at += sizeof word;
+        left -= sizeof word;
+        continue;
+      }
+    }
+    const std::size_t taken = characterLength(at, left);
+    if (taken == 0) return false;
+    at += taken;
+    left -= taken;
+  }
+  return true;
+}
+
+}  // namespace tarn::reporting

@@ -1,0 +1,142 @@
+// RingConsumer: the reading side of a ring. Copies each record out of the shared memory before anybody looks at it, so
+// that what is checked is what is used, and believes nothing that the writer wrote.
+//
+//   next() -> Record: its content is in the caller's buffer; accept() goes on, without it next() gives the same again
+//          -> Empty
+//          -> Broken: the positions or lengths make no sense; nothing more is to be read from this ring
+//
+// What was accepted is given back to the writer by publish(). One owner a ring, which also owns the memory. Threads:
+// one at a time.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+
+#include "clients/ring/RingLayout.h"
+#include "clients/ring/SharedWords.h"
+
+namespace tarn::ring {
+
+struct Record {
+  std::uint32_t kind = TARNRING_FILLER;
+  std::uint32_t length = 0;
+};
+
+enum class Look { Record, Empty, Broken };
+
+template <class Words = SharedWords>
+class RingConsumer {
+ public:
+  // Reads on where the header says that reading ended. `dataBytes` was checked once; the header's is not looked at.
+  // The sleeps are numbered from `firstSleep` on: no number that a reader of this ring had before, or its writer would
+  // believe that it has woken this one already.
+  RingConsumer(tarnring_header* header, std::byte* data, std::uint32_t dataBytes, std::uint64_t firstSleep) noexcept
+      : header_(header),
+        data_(data),
+        dataBytes_(dataBytes),
+        taken_(Words::load(&header->taken)),
+        takenMessages_(Words::load(&header->taken_messages)),
+        refused_(Words::load(&header->refused)),
+        head_(taken_),
+        sleeps_(firstSleep) {
+    awake();
+  }
+
+  // Bytes that the buffer of next() must have.
+  std::uint32_t mostContent() const noexcept { return dataBytes_ / TARNRING_RECORD_SHARE - TARNRING_RECORD_HEAD_BYTES; }
+
+  Look next(std::byte* buffer, Record& record) noexcept {
+    if (broken_ || (taken_ == head_ && !lookForMore())) return broken_ ? Look::Broken : Look::Empty;
+    std::uint64_t word = 0;
+    Words::copyOut(&word, byteAt(taken_), sizeof word);
+    record.kind = static_cast<std::uint32_t>(word >> 32U);
+    record.length = static_cast<std::uint32_t>(word);
+    if (!isWhole(record)) {
+      broken_ = true;
+      return Look::Broken;
+    }
+    size_ = TARNRING_RECORD_HEAD_BYTES + tarnring_padded(record.length);
+    if (record.kind != TARNRING_FILLER) {
+      Words::copyOut(buffer, byteAt(taken_) + TARNRING_RECORD_HEAD_BYTES, record.length);
+      return Look::Record;
+    }
+    accept(record);
+    return next(buffer, record);  // once: a filler ends where the area ends, and one there is nothing but its head
+  }
+
+  void accept(const Record& record) noexcept {
+    taken_ += size_;
+    if (record.kind == TARNRING_MESSAGE || record.kind == TARNRING_FRAME) {
+      ++takenMessages_;
+    }
+  }
+
+  // Lets the writer use the room of what was accepted.
+  void publish() noexcept {
+    Words::store(&header_->taken_messages, takenMessages_);
+    Words::storeRelease(&header_->taken, taken_);
+  }
+  void publishCommitted(std::uint64_t position, std::uint64_t messages) noexcept {
+    Words::store(&header_->committed_messages, messages);
+    Words::storeRelease(&header_->committed, position);
+  }
+  void refuse(tarnring_refusal reason) noexcept {
+    Words::store(&header_->last_refusal, reason);
+    Words::store(&header_->refused, ++refused_);
+  }
+
+  // Announces a sleep, from which the writer wakes its reader. False when there is something to read: then nothing is
+  // announced.
+  bool prepareToSleep() noexcept {
+    Words::store(&header_->asleep, sleeps_++);
+    Words::fence();
+    if (Words::loadAcquire(&header_->head) == taken_) return true;
+    awake();
+    return false;
+  }
+  void awake() noexcept { Words::store(&header_->asleep, 0); }
+
+  std::uint64_t taken() const noexcept { return taken_; }
+  std::uint64_t takenMessages() const noexcept { return takenMessages_; }
+  // As the writer tells it, which may be wrong.
+  std::uint64_t head() const noexcept { return Words::loadAcquire(&header_->head); }
+  std::uint64_t dropped() const noexcept { return Words::load(&header_->dropped); }
+  bool ended() const noexcept { return Words::loadAcquire(&header_->ended) != 0; }
+
+ private:
+  std::byte* byteAt(std::uint64_t position) const noexcept { return data_ + (position & (dataBytes_ - 1)); }
+
+  bool lookForMore() noexcept {
+    const std::uint64_t head = Words::loadAcquire(&header_->head);
+    if (head - taken_ > dataBytes_ || head % 8 != 0 || taken_ % 8 != 0) {
+      broken_ = true;
+      return false;
+    }
+    head_ = head;
+    return head_ != taken_;
+  }
+
+  bool isWhole(const Record& record) const noexcept {
+    const std::uint64_t published = head_ - taken_;
+    const std::uint64_t upToEnd = dataBytes_ - (taken_ & (dataBytes_ - 1));
+    if (record.kind == TARNRING_FILLER) {
+      return record.length == upToEnd - TARNRING_RECORD_HEAD_BYTES && upToEnd < published;
+    }
+    if (record.kind < TARNRING_FILLER || record.kind > TARNRING_GAP || record.length > mostContent()) return false;
+    const std::uint64_t size = TARNRING_RECORD_HEAD_BYTES + tarnring_padded(record.length);
+    return size <= published && size <= upToEnd;
+  }
+
+  tarnring_header* header_;
+  std::byte* data_;
+  std::uint32_t dataBytes_;
+  std::uint64_t taken_;
+  std::uint64_t takenMessages_;
+  std::uint64_t refused_;
+  std::uint64_t head_;  // as it was last seen
+  std::uint64_t sleeps_;
+  std::uint32_t size_ = 0;  // of the record that next() gave
+  bool broken_ = false;
+};
+
+}  // namespace tarn::ring

@@ -1,0 +1,154 @@
+// RingProducer: the writing side of a ring. Puts records into the shared memory and publishes them by one store, so
+// that a thread that stops or dies in the middle has published nothing.
+//
+// Keeps its positions to itself and believes nothing that the reader writes: a wrong `taken` makes the ring look full,
+// never larger. It allocates nothing, waits for nothing and makes no system call; whoever posts asks mustWake() then.
+//
+// One owner a ring, which also owns the memory. Threads: one at a time, always the same between two publications.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+
+#include "clients/ring/RingLayout.h"
+#include "clients/ring/SharedWords.h"
+
+namespace tarn::ring {
+
+// Where the content of a record goes. What is put must be just as long as the record was said to be.
+template <class Words>
+class RecordContent {
+ public:
+  explicit RecordContent(std::byte* at) noexcept : at_(at) {}
+
+  void put(std::uint64_t word) noexcept {
+    Words::copyIn(at_, &word, sizeof word);
+    at_ += sizeof word;
+  }
+  // The bytes, and zeros up to the next multiple of 8.
+  void put(const void* bytes, std::uint32_t count) noexcept {
+    if (count % 8 != 0) {
+      const std::uint64_t zeros = 0;
+      Words::copyIn(at_ + tarnring_padded(count) - sizeof zeros, &zeros, sizeof zeros);
+    }
+    if (count != 0) {
+      Words::copyIn(at_, bytes, count);
+    }
+    at_ += tarnring_padded(count);
+  }
+
+ private:
+  std::byte* at_;
+};
+
+template <class Words = SharedWords>
+class RingProducer {
+ public:
+  RingProducer() = default;
+  // The memory is zero but for what never changes in the header.
+  RingProducer(tarnring_header* header, std::byte* data, std::uint32_t dataBytes) noexcept
+      : header_(header), data_(data), dataBytes_(dataBytes) {}
+
+  // The longest content that a record may have.
+  std::uint32_t mostContent() const noexcept { return dataBytes_ / TARNRING_RECORD_SHARE - TARNRING_RECORD_HEAD_BYTES; }
+
+  // Publishes a record with a content of `length` bytes (at most mostContent()) that `fill(content)` puts. False when
+  // there is no room: then it is counted as dropped and `fill` isn't called.
+  template <class Fill>
+  bool post(tarnring_kind kind, std::uint32_t length, Fill fill) noexcept {
+    const std::uint32_t size = TARNRING_RECORD_HEAD_BYTES + tarnring_padded(length);
+    const std::uint64_t gapAt = droppedSinceGap_ != 0 ? placeFor(head_, kGapSize) : head_;
+    const std::uint64_t gapEnd = droppedSinceGap_ != 0 ? gapAt + kGapSize : head_;
+    const std::uint64_t at = placeFor(gapEnd, size);
+    if (!hasRoomUpTo(at + size)) {
+      drop(size);
+      return false;
+    }
+    if (droppedSinceGap_ != 0) {
+      putGap(gapAt);
+    }
+    putFiller(gapEnd, at);
+    putHead(at, kind, length);
+    RecordContent<Words> content(byteAt(at) + TARNRING_RECORD_HEAD_BYTES);
+    fill(content);
+    publish(at + size);
+    return true;
+  }
+
+  // Whether the reader sleeps and wasn't woken from this sleep yet; the caller wakes it. Asked after each post().
+  bool mustWake() noexcept {
+    Words::fence();
+    const std::uint64_t sleep = Words::load(&header_->asleep);
+    if (sleep == 0 || sleep == lastWoken_) return false;
+    lastWoken_ = sleep;
+    return true;
+  }
+
+  std::uint64_t head() const noexcept { return head_; }
+
+ private:
+  static constexpr std::uint32_t kGapSize = TARNRING_RECORD_HEAD_BYTES + sizeof(tarnring_gap);
+
+  std::byte* byteAt(std::uint64_t position) noexcept { return data_ + (position & (dataBytes_ - 1)); }
+
+  // The first position from `position` on where so many bytes lie in one piece.
+  std::uint64_t placeFor(std::uint64_t position, std::uint32_t size) const noexcept {
+    const std::uint64_t left = dataBytes_ - (position & (dataBytes_ - 1));
+    return size <= left ? position : position + left;
+  }
+
+  bool hasRoomUpTo(std::uint64_t end) noexcept {
+    if (end - taken_ > dataBytes_) {
+      taken_ = Words::loadAcquire(&header_->taken);
+    }
+    return end - taken_ <= dataBytes_;
+  }
+
+  void drop(std::uint32_t size) noexcept {
+    ++droppedSinceGap_;
+    droppedBytesSinceGap_ += size;
+    Words::store(&header_->dropped, ++dropped_);
+    Words::store(&header_->dropped_bytes, droppedBytes_ += size);
+  }
+
+  void putHead(std::uint64_t at, tarnring_kind kind, std::uint32_t length) noexcept {
+    const std::uint64_t word = static_cast<std::uint64_t>(kind) << 32U | length;
+    Words::copyIn(byteAt(at), &word, sizeof word);
+  }
+
+  void putFiller(std::uint64_t from, std::uint64_t to) noexcept {
+    if (from != to) {
+      putHead(from, TARNRING_FILLER, static_cast<std::uint32_t>(to - from) - TARNRING_RECORD_HEAD_BYTES);
+    }
+  }
+
+  void putGap(std::uint64_t at) noexcept {
+    putFiller(head_, at);
+    putHead(at, TARNRING_GAP, sizeof(tarnring_gap));
+    RecordContent<Words> content(byteAt(at) + TARNRING_RECORD_HEAD_BYTES);
+    content.put(droppedSinceGap_);
+    content.put(droppedBytesSinceGap_);
+    droppedSinceGap_ = 0;
+    droppedBytesSinceGap_ = 0;
+  }
+
+  void publish(std::uint64_t head) noexcept {
+    head_ = head;
+    Words::store(&header_->posted, ++posted_);
+    Words::storeRelease(&header_->head, head);
+  }
+
+  tarnring_header* header_ = nullptr;
+  std::byte* data_ = nullptr;
+  std::uint32_t dataBytes_ = 0;
+  std::uint64_t head_ = 0;
+  std::uint64_t taken_ = 0;  // as it was last seen
+  std::uint64_t posted_ = 0;
+  std::uint64_t dropped_ = 0;
+  std::uint64_t droppedBytes_ = 0;
+  std::uint64_t droppedSinceGap_ = 0;
+  std::uint64_t droppedBytesSinceGap_ = 0;
+  std::uint64_t lastWoken_ = 0;
+};
+
+}  // namespace tarn::ring

@@ -1,0 +1,41 @@
+// SharedWords: how producer and consumer of a ring touch its memory. A test gives them another one that stops at each
+// of these steps.
+//
+// Stateless. Threads: any.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+
+namespace tarn::ring {
+
+struct SharedWords {
+  static std::uint64_t load(const std::uint64_t* word) noexcept { return __atomic_load_n(word, __ATOMIC_RELAXED); }
+  static std::uint64_t loadAcquire(const std::uint64_t* word) noexcept {
+    return __atomic_load_n(word, __ATOMIC_ACQUIRE);
+  }
+  static void store(std::uint64_t* word, std::uint64_t value) noexcept {
+    __atomic_store_n(word, value, __ATOMIC_RELAXED);
+  }
+  static void storeRelease(std::uint64_t* word, std::uint64_t value) noexcept {
+    __atomic_store_n(word, value, __ATOMIC_RELEASE);
+  }
+  // Orders a store before it against a load after it.
+  static void fence() noexcept {
+#ifdef __SANITIZE_THREAD__  // which doesn't know fences
+    std::uint64_t word = 0;
+    __atomic_exchange_n(&word, 1, __ATOMIC_SEQ_CST);
+#else
+    __atomic_thread_fence(__ATOMIC_SEQ_CST);
+#endif
+  }
+  static void copyIn(std::byte* ring, const void* from, std::size_t bytes) noexcept {
+    std::memcpy(ring, from, bytes);
+  }
+  static void copyOut(void* to, const std::byte* ring, std::size_t bytes) noexcept {
+    std::memcpy(to, ring, bytes);
+  }
+};
+
+}  // namespace tarn::ring

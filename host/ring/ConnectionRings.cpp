@@ -1,0 +1,284 @@
+#include "host/ring/ConnectionRings.h"
+
+#include <sys/epoll.h>
+
+#include <algorithm>
+#include <span>
+#include <utility>
+
+#include "host/log/PrefixedLog.h"
+#include "host/ring/RingBoard.h"
+
+namespace tarn::linux_host {
+
+namespace {
+
+constexpr std::string_view kModule = "ConnectionRings";
+
+tarnring_refusal refusalOf(wire::ErrorCode code) {
+  return static_cast<tarnring_refusal>(code);
+}
+static_assert(static_cast<int>(wire::ErrorCode::UnknownOperation) == TARNRING_UNKNOWN_OPERATION &&
+              static_cast<int>(wire::ErrorCode::BadArguments) == TARNRING_BAD_ARGUMENTS &&
+              static_cast<int>(wire::ErrorCode::NotPropertyList) == TARNRING_NOT_PROPERTY_LIST);
+
+}  // namespace
+
+ConnectionRings::ConnectionRings(RingBoard& board, std::weak_ptr<RingOwner> owner)
+    : board_(board), owner_(std::move(owner)) {}
+
+ConnectionRings::~ConnectionRings() {
+  for (const auto& reader : rings_) {
+    close(*reader);
+  }
+}
+
+ConnectionRings::Opened ConnectionRings::open(std::vector<UniqueDescriptor> descriptors) {
+  RingMemory memory;
+  if (const std::optional<RingFault> fault = check(descriptors, memory)) return refuse(*fault);
+  const auto reader = std::make_shared<RingReader>(std::move(memory), std::move(descriptors[1]),
+                                                   static_cast<std::uint64_t>(board_.loop.clock().monotonic().count()),
+                                                   [weak = weak_from_this()](RingReader& woken) {
+                                                     if (const auto self = weak.lock()) {
+                                                       self->wake(woken);
+                                                     }
+                                                   });
+  // By the edge: nobody reads it, so it stays ready.
+  if (!board_.loop.watch(reader->wakeDescriptor(), EPOLLIN | EPOLLET, reader)) return refuse(RingFault::System);
+  reader->lastRecord = board_.loop.clock().monotonic();
+  buffer_.resize(std::max<std::size_t>(buffer_.size(), reader->consumer().mostContent()));
+  rings_.push_back(reader);
+  ++board_.counts.open;
+  ++board_.counts.opened;
+  board_.counts.bytesOpen += reader->bytes();
+  board_.activate(shared_from_this());
+  return {nextNumber_++, {}};
+}
+
+std::optional<RingFault> ConnectionRings::check(const std::vector<UniqueDescriptor>& descriptors,
+                                                RingMemory& memory) const {
+  if (descriptors.size() != 2 || !isEventDescriptor(descriptors[1].get())) return RingFault::Descriptors;
+  if (ending_ || rings_.size() >= board_.limits.maxRingsAConnection || board_.counts.open >= board_.limits.maxRings) {
+    return RingFault::TooMany;
+  }
+  if (const std::optional<RingFault> fault = memory.map(descriptors[0].get())) return fault;
+  return board_.isOpen(memory.identity()) ? std::optional(RingFault::InUse) : std::nullopt;
+}
+
+ConnectionRings::Opened ConnectionRings::refuse(RingFault fault) {
+  board_.counts.count(fault);
+  const auto owner = owner_.lock();
+  if (owner != nullptr && !std::exchange(refusalLogged_, true)) {
+    logPrefixed(board_.log, kConnectionCategory, platform::LogLevel::Error, kModule,
+                "refused a ring of " + owner->description() + ": " + textOf(fault));
+  }
+  return {0, std::string("openRing: ") + textOf(fault)};
+}
+
+std::string ConnectionRings::declareShape(const plist::Dictionary& description) {
+  std::string wrong = shapes_.declare(description);
+  if (!rings_.empty()) {
+    board_.activate(shared_from_this());  // a message may have waited for it
+  }
+  return wrong.empty() ? wrong : "declareShape: " + wrong;
+}
+
+void ConnectionRings::end(Drained drained) {
+  ending_ = true;
+  drained_ = std::move(drained);
+  for (const auto& reader : rings_) {
+    reader->endAtHead();
+    wake(*reader);
+  }
+  closeFinished();
+}
+
+bool ConnectionRings::isActive() const noexcept {
+  return std::any_of(rings_.begin(), rings_.end(),
+                     [](const auto& reader) { return !reader->asleep || reader->awaitsCommit(); });
+}
+
+bool ConnectionRings::isAwake() const noexcept {
+  return std::any_of(rings_.begin(), rings_.end(), [](const auto& reader) { return !reader->asleep; });
+}
+
+bool ConnectionRings::has(const RingIdentity& identity) const noexcept {
+  return std::any_of(rings_.begin(), rings_.end(), [&](const auto& reader) { return reader->identity() == identity; });
+}
+
+bool ConnectionRings::serveTurn(std::chrono::nanoseconds now) {
+  std::size_t share = board_.limits.turnBytes;
+  std::vector<std::shared_ptr<RingReader>> served;
+  for (std::size_t i = 0; i < rings_.size(); ++i) {
+    const auto reader = rings_[(first_ + i) % rings_.size()];
+    if (reader->asleep) continue;
+    const std::uint64_t before = reader->consumer().taken();
+    const bool held = serveRing(*reader, share);
+    const std::uint64_t dropped = reader->newlyDropped();
+    dropped_ += dropped;
+    board_.counts.droppedByClients += dropped;
+    if (reader->consumer().taken() != before) {
+      reader->consumer().publish();
+      served.push_back(reader);
+    }
+    if (held || reader->consumer().taken() != before) {
+      reader->lastRecord = now;
+    } else {
+      rest(*reader, now);
+    }
+  }
+  first_ = rings_.empty() ? 0 : (first_ + 1) % rings_.size();
+  noteDoneAfterTheWork(served);
+  follow();
+  closeFinished();
+  return share == 0;
+}
+
+// Tells what the recorder has of it, where somebody waits for that.
+void ConnectionRings::follow() {
+  const bool awaited =
+      std::any_of(rings_.begin(), rings_.end(), [](const auto& reader) { return reader->awaitsCommit(); });
+  if (awaited) {
+    const CommitPoint point = board_.commitPoint();
+    for (const auto& reader : rings_) {
+      reader->follow(point);
+    }
+  }
+}
+
+// Serves records until there are none, the share is used up or one is held. Whether one is.
+bool ConnectionRings::serveRing(RingReader& reader, std::size_t& share) {
+  const auto owner = owner_.lock();
+  while (owner != nullptr && share != 0 && !reader.finished && !reader.isAtEnd()) {
+    const Step step = serveRecord(reader, *owner, share);
+    if (step == Step::Held) return true;
+    if (step == Step::Nothing) {
+      reader.finished = reader.finished || reader.ending() || reader.consumer().ended();
+      return false;
+    }
+  }
+  reader.finished = reader.finished || owner == nullptr || reader.isAtEnd();
+  return false;
+}
+
+ConnectionRings::Step ConnectionRings::serveRecord(RingReader& reader, RingOwner& owner, std::size_t& share) {
+  ring::Record record;
+  const ring::Look look = reader.consumer().next(buffer_.data(), record);
+  if (look == ring::Look::Broken) {
+    reader.finished = true;
+    board_.counts.count(RingFault::Broken);
+    logPrefixed(board_.log, kConnectionCategory, platform::LogLevel::Error, kModule,
+                "closed a ring of " + owner.description() + ": " + textOf(RingFault::Broken));
+  }
+  if (look != ring::Look::Record) return Step::Nothing;
+  Step step = Step::Served;
+  if (record.kind == TARNRING_GAP) {
+    ++board_.counts.gaps;
+  } else if (!owner.takesRingRequests()) {
+    step = Step::Held;
+  } else {
+    const std::span<const std::byte> content(buffer_.data(), record.length);
+    step = record.kind == TARNRING_MESSAGE ? serveMessage(reader, owner, content) : serveFrame(reader, owner, content);
+  }
+  if (step == Step::Served) {
+    reader.consumer().accept(record);
+    share -= std::min<std::size_t>(share, TARNRING_RECORD_HEAD_BYTES + tarnring_padded(record.length));
+  }
+  return step;
+}
+
+ConnectionRings::Step ConnectionRings::serveMessage(RingReader& reader, RingOwner& owner,
+                                                    std::span<const std::byte> content) {
+  switch (shapes_.decode(content, board_.request)) {
+    case ShapeTable::Decoded::UnknownShape:
+      // It may be on its way on the socket still.
+      return reader.ending() ? refuseRecord(reader, TARNRING_UNKNOWN_SHAPE) : Step::Held;
+    case ShapeTable::Decoded::BadValues:
+      return refuseRecord(reader, TARNRING_BAD_VALUES);
+    case ShapeTable::Decoded::Ok:
+      break;
+  }
+  ++board_.counts.messages;
+  owner.serveRingRequest(board_.request);
+  return Step::Served;
+}
+
+ConnectionRings::Step ConnectionRings::serveFrame(RingReader& reader, RingOwner& owner,
+                                                  std::span<const std::byte> content) {
+  switch (board_.decoder.decode(content, board_.request, board_.refusal)) {
+    case wire::DecodeVerdict::Unreadable:
+      return refuseRecord(reader, TARNRING_UNREADABLE);
+    case wire::DecodeVerdict::Refused:
+      return refuseRecord(reader, refusalOf(board_.refusal.code));
+    case wire::DecodeVerdict::Ok:
+      break;
+  }
+  if (board_.request.operation == wire::Operation::DeclareShape) {
+    return shapes_.declare(board_.request.dictionary).empty() ? Step::Served
+                                                              : refuseRecord(reader, TARNRING_BAD_ARGUMENTS);
+  }
+  if (wire::rowOf(board_.request.operation).servedBy == wire::ServedBy::Host) {
+    return refuseRecord(reader, TARNRING_UNKNOWN_OPERATION);
+  }
+  board_.counts.messages += board_.request.operation == wire::Operation::SendMessage ? 1 : 0;
+  owner.serveRingRequest(board_.request);
+  return Step::Served;
+}
+
+// Counted, and gone on with.
+ConnectionRings::Step ConnectionRings::refuseRecord(RingReader& reader, tarnring_refusal reason) {
+  board_.counts.count(reason);
+  reader.consumer().refuse(reason);
+  return Step::Served;
+}
+
+// Once the work that the records became has run, the recorder has got what comes of it.
+void ConnectionRings::noteDoneAfterTheWork(const std::vector<std::shared_ptr<RingReader>>& served) {
+  const auto owner = owner_.lock();
+  for (const auto& reader : served) {
+    if (owner == nullptr) return;
+    reader->noteAsked();
+    owner->afterRingRequests([reader, position = reader->consumer().taken(),
+                              messages = reader->consumer().takenMessages()] { reader->noteDone(position, messages); });
+  }
+}
+
+void ConnectionRings::rest(RingReader& reader, std::chrono::nanoseconds now) {
+  if (!reader.finished && now - reader.lastRecord >= board_.limits.awakeFor) {
+    reader.asleep = reader.consumer().prepareToSleep();
+  }
+}
+
+void ConnectionRings::wake(RingReader& reader) {
+  if (std::exchange(reader.asleep, false)) {
+    reader.consumer().awake();
+  }
+  reader.lastRecord = board_.loop.clock().monotonic();
+  board_.activate(shared_from_this());
+}
+
+void ConnectionRings::closeFinished() {
+  const auto last = std::stable_partition(rings_.begin(), rings_.end(), [](const auto& reader) {
+    return !reader->finished || (!reader->ending() && reader->awaitsCommit());
+  });
+  for (auto reader = last; reader != rings_.end(); ++reader) {
+    close(**reader);
+  }
+  rings_.erase(last, rings_.end());
+  if (!ending_ || !rings_.empty() || !drained_) return;
+  const auto owner = owner_.lock();
+  if (dropped_ != 0 && owner != nullptr) {
+    logPrefixed(
+        board_.log, kConnectionCategory, platform::LogLevel::Default, kModule,
+        owner->description() + " dropped " + std::to_string(dropped_) + " messages for want of room in its rings");
+  }
+  std::exchange(drained_, {})();
+}
+
+void ConnectionRings::close(RingReader& reader) {
+  board_.loop.unwatch(reader.wakeDescriptor());
+  --board_.counts.open;
+  board_.counts.bytesOpen -= reader.bytes();
+}
+
+}  // namespace tarn::linux_host

@@ -1,0 +1,59 @@
+// RingMemory: the memory of a client's ring, checked and mapped.
+//
+// The client is not trusted: its file must be memory that can't shrink (reading a page that is gone would end the
+// process), of a size that a ring may have. The size is asked of the system once and kept.
+//
+// Owned by a ring's reader. Threads: one at a time.
+#pragma once
+
+#include <sys/types.h>
+
+#include <cstddef>
+#include <cstdint>
+#include <optional>
+
+#include "clients/ring/RingLayout.h"
+#include "host/ring/RingCounts.h"
+
+namespace tarn::linux_host {
+
+// Which memory file it is, whatever descriptor leads to it.
+struct RingIdentity {
+  dev_t device = 0;
+  ino_t inode = 0;
+  bool operator==(const RingIdentity&) const = default;
+};
+
+class RingMemory {
+ public:
+  RingMemory() = default;
+  RingMemory(RingMemory&& other) noexcept { swap(other); }
+  RingMemory& operator=(RingMemory&& other) noexcept {
+    swap(other);
+    return *this;
+  }
+  RingMemory(const RingMemory&) = delete;
+  RingMemory& operator=(const RingMemory&) = delete;
+  ~RingMemory();
+
+  // Maps the file; what is wrong with it, or nothing. The descriptor may be closed afterwards.
+  [[nodiscard]] std::optional<RingFault> map(int descriptor);
+  void unmap() noexcept;
+
+  tarnring_header* header() const noexcept { return static_cast<tarnring_header*>(mapping_); }
+  std::byte* data() const noexcept { return static_cast<std::byte*>(mapping_) + TARNRING_HEADER_BYTES; }
+  std::uint32_t dataBytes() const noexcept { return dataBytes_; }
+  const RingIdentity& identity() const noexcept { return identity_; }
+
+ private:
+  void swap(RingMemory& other) noexcept;
+
+  void* mapping_ = nullptr;
+  std::uint32_t dataBytes_ = 0;
+  RingIdentity identity_;
+};
+
+// Whether the descriptor is an eventfd. Another kind would be ready to read for ever, or never.
+bool isEventDescriptor(int descriptor);
+
+}  // namespace tarn::linux_host

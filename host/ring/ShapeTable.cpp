@@ -1,0 +1,205 @@
+#include "host/ring/ShapeTable.h"
+
+#include <algorithm>
+#include <array>
+#include <bit>
+#include <cstring>
+#include <limits>
+#include <string_view>
+#include <utility>
+
+#include "plist/Dictionary.h"
+#include "wire/Utf8.h"
+
+namespace tarn::linux_host {
+
+namespace {
+
+constexpr std::string_view kStampKey = "tarnreporting_timestamp";
+constexpr std::array<std::string_view, 7> kKindNames{"integer", "unsigned", "double", "date",
+                                                     "boolean", "text",     "data"};
+
+// Walks over the values of a message, each of which takes a multiple of 8 bytes.
+class ValueWords {
+ public:
+  explicit ValueWords(std::span<const std::byte> bytes) noexcept : left_(bytes) {}
+
+  bool atEnd() const noexcept { return left_.empty(); }
+  bool take(std::uint64_t& word) noexcept {
+    if (left_.size() < sizeof word) return false;
+    std::memcpy(&word, left_.data(), sizeof word);
+    left_ = left_.subspan(sizeof word);
+    return true;
+  }
+  bool takeBytes(std::string_view& bytes) noexcept {
+    std::uint64_t length = 0;
+    if (!take(length) || length > left_.size()) return false;
+    const std::size_t padded = (static_cast<std::size_t>(length) + 7) / 8 * 8;
+    if (padded > left_.size()) return false;
+    bytes = {reinterpret_cast<const char*>(left_.data()), static_cast<std::size_t>(length)};
+    left_ = left_.subspan(padded);
+    return true;
+  }
+
+ private:
+  std::span<const std::byte> left_;
+};
+
+bool takeString(ValueWords& words, ShapeKind kind, plist::ValueView& value) {
+  std::string_view bytes;
+  if (!words.takeBytes(bytes) || (kind == ShapeKind::Text && !wire::isUtf8(bytes))) return false;
+  value = kind == ShapeKind::Text ? plist::ValueView(bytes) : plist::ValueView(plist::DataView{bytes});
+  return true;
+}
+
+bool takeValue(ValueWords& words, ShapeKind kind, plist::ValueView& value) {
+  if (kind == ShapeKind::Text || kind == ShapeKind::Data) return takeString(words, kind, value);
+  std::uint64_t word = 0;
+  if (!words.take(word)) return false;
+  switch (kind) {
+    case ShapeKind::Unsigned:
+      // One integer has one kind: unsigned only where signed can't hold it.
+      value = std::in_range<std::int64_t>(word) ? plist::ValueView(static_cast<std::int64_t>(word))
+                                                : plist::ValueView(word);
+      return true;
+    case ShapeKind::Double:
+      value = std::bit_cast<double>(word);
+      return true;
+    case ShapeKind::Date:
+      value = plist::Date{std::bit_cast<double>(word)};
+      return true;
+    case ShapeKind::Boolean:
+      value = word == 1;
+      return word <= 1;
+    default:
+      value = static_cast<std::int64_t>(word);
+      return true;
+  }
+}
+
+bool readNumber(const plist::ValueView& value, std::uint64_t most, std::uint64_t& number) {
+  if (value.kind() != plist::Kind::Signed || value.signedValue() < 0) return false;
+  number = static_cast<std::uint64_t>(value.signedValue());
+  return number <= most;
+}
+
+bool readReporterIDs(const plist::ValueView& value, wire::ReporterIDs& reporterIDs) {
+  if (!value) return true;
+  if (value.kind() != plist::Kind::Array) return false;
+  reporterIDs.emplace();
+  for (const plist::ValueView& item : value.array()) {
+    if (item.kind() != plist::Kind::Signed) return false;
+    reporterIDs->push_back(item.signedValue());
+  }
+  return reporterIDs->size() <= TARNRING_MOST_KEYS;
+}
+
+bool isKnownMember(std::string_view name) {
+  constexpr std::array<std::string_view, 6> kNames{"shape", "category", "type", "reporterIDs", "keys", "kinds"};
+  return std::find(kNames.begin(), kNames.end(), name) != kNames.end();
+}
+
+}  // namespace
+
+std::string ShapeTable::declare(const plist::Dictionary& description) {
+  std::uint64_t number = 0;
+  if (!readNumber(description["shape"], TARNRING_MOST_SHAPES - 1, number)) return "shape: 0 to 1023 expected";
+  for (const auto& entry : description) {
+    if (!isKnownMember(entry.key.text())) return "nothing is known by the name " + std::string(entry.key.text());
+  }
+  if (number >= shapes_.size()) {
+    shapes_.resize(number + 1);
+  }
+  if (description.size() == 1) {
+    shapes_[number].reset();
+    return {};
+  }
+  auto shape = std::make_unique<Shape>();
+  if (std::string wrong = read(description, *shape); !wrong.empty()) return wrong;
+  shapes_[number] = std::move(shape);
+  return {};
+}
+
+std::string ShapeTable::read(const plist::Dictionary& description, Shape& shape) {
+  std::uint64_t category = 0;
+  std::uint64_t type = 0;
+  if (!readNumber(description["category"], std::numeric_limits<std::uint32_t>::max(), category)) {
+    return "category: 0 to 4294967295 expected";
+  }
+  if (!readNumber(description["type"], std::numeric_limits<std::uint16_t>::max(), type)) {
+    return "type: 0 to 65535 expected";
+  }
+  shape.category = static_cast<std::uint32_t>(category);
+  shape.type = static_cast<std::uint16_t>(type);
+  if (!readReporterIDs(description["reporterIDs"], shape.reporterIDs)) {
+    return "reporterIDs: an array of at most 64 signed 64-bit integers expected";
+  }
+  return readKeys(description, shape);
+}
+
+std::string ShapeTable::readKeys(const plist::Dictionary& description, Shape& shape) {
+  if (description["keys"].kind() != plist::Kind::Array || description["kinds"].kind() != plist::Kind::Array) {
+    return "keys and kinds: arrays expected";
+  }
+  const plist::Array keys = description["keys"].array();
+  const plist::Array kinds = description["kinds"].array();
+  if (keys.size() != kinds.size() || keys.size() > TARNRING_MOST_KEYS) {
+    return "keys and kinds: as many of each expected, at most 64";
+  }
+  std::vector<std::string_view> names;
+  for (const plist::ValueView& key : keys) {
+    if (!key.isText() || key.text().size() > TARNRING_MOST_KEY_BYTES) {
+      return "keys: texts of at most 255 bytes expected";
+    }
+    names.push_back(key.text());
+  }
+  for (const plist::ValueView& kind : kinds) {
+    const auto* const found = std::find(kKindNames.begin(), kKindNames.end(), kind.isText() ? kind.text() : "");
+    if (found == kKindNames.end()) return "kinds: the name of a kind expected";
+    shape.kinds.push_back(static_cast<ShapeKind>(found - kKindNames.begin()));
+  }
+  shape.addsStamp = std::find(names.begin(), names.end(), kStampKey) == names.end();
+  if (shape.addsStamp) {
+    names.push_back(kStampKey);
+  }
+  std::optional<plist::KeyList> list = plist::KeyList::make(names);
+  if (!list) return "keys: a key given twice";
+  shape.keys = std::move(*list);
+  return {};
+}
+
+ShapeTable::Decoded ShapeTable::decode(std::span<const std::byte> content, wire::DecodedRequest& request) {
+  tarnring_message head{};
+  if (content.size() < sizeof head) return Decoded::BadValues;
+  std::memcpy(&head, content.data(), sizeof head);
+  if (head.shape >= shapes_.size() || shapes_[head.shape] == nullptr) {
+    return head.shape < TARNRING_MOST_SHAPES ? Decoded::UnknownShape : Decoded::BadValues;
+  }
+  const Shape& shape = *shapes_[head.shape];
+  ValueWords words(content.subspan(sizeof head));
+  bool fits = head.count == shape.kinds.size();
+  builder_.begin();
+  for (auto kind = shape.kinds.begin(); fits && kind != shape.kinds.end(); ++kind) {
+    plist::ValueView value;
+    fits = takeValue(words, *kind, value);
+    if (fits) {
+      builder_.add(value);
+    }
+  }
+  if (!fits || !words.atEnd()) {
+    builder_.reset();
+    return Decoded::BadValues;
+  }
+  if (shape.addsStamp) {
+    builder_.add(static_cast<double>(head.stamp) / 1e9);
+  }
+  request = {};
+  request.operation = wire::Operation::SendMessage;
+  request.dictionary = builder_.finishDictionary(shape.keys);
+  request.category = shape.category;
+  request.type = shape.type;
+  request.reporterIDs = shape.reporterIDs;
+  return Decoded::Ok;
+}
+
+}  // namespace tarn::linux_host
