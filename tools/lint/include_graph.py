@@ -30,6 +30,9 @@ ROOMS = {
     "client/include/tarnkit": (),
     "client": ("plist", "wire", "client/include/tarnkit"),
     "client/tarnkit": ("plist", "wire", "client", "client/include/tarnkit"),
+    # What can be said, as data, and the constants that are made of it.
+    "dictionary": (),
+    "clients/c/include": (),
     "platform": VALUES,
     "service/vocabulary": BASE,
     "session": BASE + ("service/vocabulary",),
@@ -52,7 +55,7 @@ ROOMS = {
     "testing": BASE + ("service/vocabulary", "testing/backends"),
     "tools/script": PROGRAM,
     "tools/mutate": (),
-    "tools/ctl": PROGRAM + ("client", "tools/script"),
+    "tools/ctl": PROGRAM + ("client", "dictionary", "tools/script"),
     # What checks the service shares no code with it, but for the client and the reader of the recorder's file.
     "tests/scenario": VALUES + ("client", "wire", "recorder/store"),
 }
