@@ -57,8 +57,7 @@ def document(table):
 
 
 def names(table):
-    blocks = ["## Categories, types, service types\n\nMessages and scripts give them by number; scripts also by name,"
-              " where no number stands beside it in\nparentheses."]
+    blocks = ["## Categories, types, service types\n\nMessages give them by number, scripts by number or by name."]
     for title, what, entries in (("Categories", "category", table.categories), ("Types", "type", table.types),
                                  ("Service types", "service type", table.services)):
         blocks.append(f"### {title}\n\n" + rows("number", what, [
@@ -75,9 +74,11 @@ def number(value):
 
 
 def key_table(keys):
+    derives = any(key.derives for key in keys)
     return rows("key", "kind, unit, range", [
-        (f"`{cell(key.name)}`", key.measure(), meaning(key), parts(key.readers), parts(key.writers))
-        for key in keys], "meaning", "read by", "written by")
+        (f"`{cell(key.name)}`", key.measure(), meaning(key), *([cell(key.derives)] if derives else []),
+         parts(key.readers), parts(key.writers)) for key in keys],
+        "meaning", *(["what it derives"] if derives else []), "read by", "written by")
 
 
 def meaning(key):
@@ -88,8 +89,6 @@ def meaning(key):
         said.append("In: " + ", ".join(key.places) + ".")
     if key.only_in:
         said.append("Read in " + ", ".join(f"`{place}`" for place in key.only_in) + " alone.")
-    if key.derives:
-        said.append(key.derives)
     return cell(" ".join(said))
 
 
