@@ -1,6 +1,10 @@
 #include "dictionary/MessageDictionary.h"
 
 #include <algorithm>
+#include <array>
+#include <charconv>
+#include <cmath>
+#include <system_error>
 
 namespace tarn::dictionary {
 
@@ -59,6 +63,29 @@ std::string_view nameOf(KeyKind kind) noexcept {
       break;
   }
   return "any";
+}
+
+std::string rangeOf(const MessageKey& key) {
+  if (key.greatest == kUnbounded) return {};
+  return numberText(key.least) + " to " + numberText(key.greatest);
+}
+
+std::string measureOf(const MessageKey& key) {
+  std::string text(nameOf(key.kind));
+  for (const std::string& more : {std::string(key.unit), rangeOf(key)}) {
+    text += more.empty() ? "" : ", " + more;
+  }
+  return text;
+}
+
+std::string numberText(double number) {
+  constexpr double kExact = 1e15;
+  if (std::abs(number) < kExact && number == std::trunc(number)) {
+    return std::to_string(static_cast<std::int64_t>(number));
+  }
+  std::array<char, 32> buffer{};
+  const auto [end, error] = std::to_chars(buffer.data(), buffer.data() + buffer.size(), number);
+  return error == std::errc() ? std::string(buffer.data(), end) : std::string();
 }
 
 }  // namespace tarn::dictionary

@@ -7,6 +7,7 @@
 #include <cstdint>
 #include <limits>
 #include <span>
+#include <string>
 #include <string_view>
 
 namespace tarn::dictionary {
@@ -73,5 +74,11 @@ const MessageKey* keyOf(std::string_view name) noexcept;
 bool lists(std::string_view list, std::string_view name) noexcept;
 // "boolean", "integer", "number", "text" or "any".
 std::string_view nameOf(KeyKind kind) noexcept;
+// The least and the greatest value, "0 to 1"; empty when there are no bounds.
+std::string rangeOf(const MessageKey& key);
+// Kind, unit and range: "number, s, 0 to 10".
+std::string measureOf(const MessageKey& key);
+// A number for people: whole ones without an exponent.
+std::string numberText(double number);
 
 }  // namespace tarn::dictionary
