@@ -27,5 +27,7 @@ void addNotifyCommand(CLI::App& app, Context& context);
 void addReportersCommand(CLI::App& app, Context& context);
 void addKillCommand(CLI::App& app, Context& context);
 void addStatusCommand(CLI::App& app, Context& context);
+void addLintCommand(CLI::App& app, Context& context);
+void addExplainCommand(CLI::App& app, Context& context);
 
 }  // namespace tarn::ctl

@@ -42,6 +42,8 @@ void describe(CLI::App& app, Context& context) {
   addReportersCommand(app, context);
   addKillCommand(app, context);
   addStatusCommand(app, context);
+  addLintCommand(app, context);
+  addExplainCommand(app, context);
 }
 
 // Parses; `context.chosen` is what to do then, unless everything is done and the exit status returned.
