@@ -56,14 +56,13 @@ void ServiceProcess::start(const std::string& program) {
 void ServiceProcess::waitUntilReady() const {
   const double latest = nowSeconds() + kReadySeconds;
   for (;;) {
-    int errorNumber = 0;
-    std::string error;
-    if (client::Socket::connect(socketPath(), errorNumber, error).open()) return;
+    const Result<client::Socket> connected = client::Socket::connect(socketPath());
+    if (connected.ok()) return;
     if (::waitpid(id_, nullptr, WNOHANG) != 0) {
       fail("the service ended at once");
     }
     if (nowSeconds() > latest) {
-      fail("the service doesn't answer: " + error);
+      fail("the service doesn't answer: " + connected.error.text());
     }
     ::usleep(2000);
   }

@@ -1,6 +1,5 @@
 #include "derived/TarnReportingSessionSummaryJsonFileWorker.h"
 
-#include <algorithm>
 #include <cstdint>
 #include <unordered_map>
 #include <utility>
@@ -10,6 +9,7 @@
 #include "platform/LocalCalendar.h"
 #include "plist/EscapedText.h"
 #include "plist/formats/Json.h"
+#include "service/vocabulary/FileNameText.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
 #include "service/vocabulary/TarnReportingUtility.h"
@@ -31,11 +31,7 @@ using Counts = std::unordered_map<std::string, std::uint64_t>;
 // The file's path without ".json".
 std::string pathStem(const std::string& directory, const TarnReportingSession& session) {
   const platform::Facilities& facilities = TarnReportingFacilities();
-  std::string application = TarnReportingUtilityRetrieveAppName(session.configuration());
-  // What no file name can hold.
-  std::replace_if(
-      application.begin(), application.end(), [](char character) { return character == '/' || character == '\0'; },
-      '_');
+  const std::string application = fileNameText(TarnReportingUtilityRetrieveAppName(session.configuration()));
   std::string stem = directory + "/";
   stem += facilities.localCalendar.format(facilities.clock.epochSeconds(), "yyyyMMdd-HHmmssZ");
   stem += "-" + std::to_string(session.reporterID()) + "-" + application + "-";

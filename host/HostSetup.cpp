@@ -1,5 +1,10 @@
 #include "host/HostSetup.h"
 
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <chrono>
 #include <utility>
 
 #include "host/log/LogTarget.h"
@@ -10,6 +15,9 @@ namespace tarn::linux_host {
 
 namespace {
 
+// A log whose reader is stuck must not hold up the end.
+constexpr std::chrono::milliseconds kLastWhileOfTheLog{500};
+
 // The listening socket: the one handed over, else the right to the one named.
 Result<ListenSocket> openSocket(const ServiceOptions& options) {
   Result<ListenSocket> handedOver = ListenSocket::takeHandedOver();
@@ -19,14 +27,21 @@ Result<ListenSocket> openSocket(const ServiceOptions& options) {
   }
   if (options.socketIsDefault) {
     const std::string folder = options.socketPath->substr(0, options.socketPath->rfind('/'));
-    static_cast<void>(createDirectories(folder, 0755));  // binding tells when it failed
+    static_cast<void>(createDirectories(folder, 0750));  // binding tells when it failed
   }
   return ListenSocket::claim(*options.socketPath);
+}
+
+// Also when it only can't be told: reading it says what is wrong.
+bool isThere(const std::string& path) {
+  return !path.empty() && (::access(path.c_str(), F_OK) == 0 || (errno != ENOENT && errno != ENOTDIR));
 }
 
 }  // namespace
 
 Status HostSetup::prepare(const ServiceOptions& options) {
+  // Whatever a caller's mask lets through: what the service makes is for its user and group alone.
+  ::umask(::umask(0) | S_IWGRP | S_IRWXO);
   if (const Status read = readSettings(options); read.failed()) return Error{kExitConfiguration, read->text};
   if (const Status prepared = prepareStateDirectory(options.stateDirectory); prepared.failed()) {
     return Error{kExitFailure, prepared->text};
@@ -38,15 +53,22 @@ Status HostSetup::prepare(const ServiceOptions& options) {
   if (const Status held = holdStateDirectory(options.stateDirectory, stateLock_); held.failed()) {
     return Error{kExitFailure, held->text};
   }
-  OpenedLog opening = openLog(options.logTarget, options.logLevel, clock);
-  log = std::move(opening.log);
-  if (!log) return Error{kExitFailure, std::move(opening.error)};
+  Result<std::unique_ptr<QueuedLog>> opening = openLog(options.logTarget, options.logLevel, clock);
+  if (opening.failed()) return Error{kExitFailure, opening.error->text};
+  queuedLog_ = std::move(opening.value);
+  log = std::make_unique<LogFloodGuard>(*queuedLog_, clock);
   return {};
 }
 
+void HostSetup::settleLog() {
+  log->tellCounts();
+  static_cast<void>(queuedLog_->settle(kLastWhileOfTheLog));
+}
+
 Status HostSetup::readSettings(const ServiceOptions& options) {
-  if (options.configurationFile) {
-    Result<HostConfiguration> read = readConfiguration(*options.configurationFile);
+  // One that is named must be there; the installed one may be absent.
+  if (const auto& file = options.configurationFile; file || isThere(options.defaultConfigurationFile)) {
+    Result<HostConfiguration> read = readConfiguration(file.value_or(options.defaultConfigurationFile));
     if (read.failed()) return std::move(read.error);
     configuration = std::move(read.value);
   }

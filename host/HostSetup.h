@@ -6,6 +6,8 @@
 
 #include <memory>
 
+#include "host/log/LogFloodGuard.h"
+#include "host/log/QueuedLog.h"
 #include "host/loop/SignalSource.h"
 #include "host/machine/LinuxClock.h"
 #include "host/settings/HostConfiguration.h"
@@ -13,7 +15,6 @@
 #include "host/settings/ServiceOptions.h"
 #include "host/socket/ListenSocket.h"
 #include "host/system/FileLock.h"
-#include "platform/Log.h"
 #include "plist/Result.h"
 
 namespace tarn::linux_host {
@@ -27,18 +28,22 @@ class HostSetup {
   // Called once. An error tells what is in the way, in one line for whoever started the service, and its code is the
   // exit status; then nothing else may be used.
   [[nodiscard]] Status prepare(const ServiceOptions& options);
+  // Gives what was logged a last while to be written; the process may end then.
+  void settleLog();
 
   HostConfiguration configuration;
   JsonDeviceProperties deviceProperties;
   std::shared_ptr<SignalSource> signals;
   ListenSocket socket;
   LinuxClock clock;
-  std::unique_ptr<platform::Log> log;
+  // The guard against floods, in front of the queue.
+  std::unique_ptr<LogFloodGuard> log;
 
  private:
   Status readSettings(const ServiceOptions& options);
 
   FileLock stateLock_;
+  std::unique_ptr<QueuedLog> queuedLog_;
 };
 
 }  // namespace tarn::linux_host

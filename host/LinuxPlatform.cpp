@@ -6,7 +6,7 @@
 #include <limits>
 #include <utility>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 #include "host/loop/Settling.h"
 #include "host/system/DescriptorLimit.h"
 #include "host/system/Files.h"
@@ -17,14 +17,21 @@ namespace tarn::linux_host {
 namespace {
 
 constexpr std::string_view kModule = "LinuxPlatform";
+// What a commit to a slow disk may take, as it is told to the service manager.
+constexpr std::chrono::seconds kLongestCommit{15};
+constexpr std::chrono::seconds kLongestFlush{10};
 
 HostLimits withinTheSystem(HostLimits limits) {
   limits.maxConnections = std::min(limits.maxConnections, connectionsWithin(raiseDescriptorLimit()));
   return limits;
 }
 
-recorder::RecorderOptions inFolder(recorder::RecorderOptions options, const std::string& stateDirectory) {
+// Under the recorder's cap stands all that the service writes without end.
+recorder::RecorderOptions recorderOptions(const HostConfiguration& configuration, const std::string& stateDirectory) {
+  recorder::RecorderOptions options = configuration.recorder;
   options.file = stateDirectory + "/recorder.sqlite3";
+  const std::string logs = configuration.paths.diagnosticLogs.value_or(stateDirectory) + "/DiagnosticLogs/Audio/";
+  options.folders = {logs + "Reporting", logs + "Traces"};
   return options;
 }
 
@@ -40,16 +47,19 @@ std::vector<FlumeSource*> sources(FlumeFiles& files, std::optional<AlsaFlume>& a
 }  // namespace
 
 LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::string& stateDirectory,
-                             JsonDeviceProperties deviceProperties, const Ground& ground)
+                             JsonDeviceProperties deviceProperties, Ground ground)
     : settleTime_(configuration.limits.settleTime),
+      endTime_(configuration.limits.endTime),
       // Not the machine's own: the names in it are known beforehand, and nobody else is to be in the way.
       temporaryDirectory_(stateDirectory + "/tmp"),
       clock_(ground.clock),
       log_(ground.log),
       serviceManager_(ground.serviceManager),
+      settleLog_(std::move(ground.settleLog)),
       loop_(clock_),
       connections_(loop_, log_, withinTheSystem(configuration.limits)),
-      recorder_(inFolder(configuration.recorder, stateDirectory), log_, clock_),
+      recorderEnabled_(configuration.recorderEnabled),
+      recorder_(recorderOptions(configuration, stateDirectory), log_, clock_),
       workQueues_(clock_, loop_.queue(), configuration.limits.poolWork),
       tally_(recorder_, clock_, configuration.tally.inUse),
       wattlog_(recorder_, clock_),
@@ -74,37 +84,44 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
       traceAnalysis_(configuration.paths.traceAnalysis.value_or(LinuxTraceAnalysis::defaultPath()), log_),
       deviceProperties_(std::move(deviceProperties)),
       watchdog_(clock_, loop_.progress(), serviceManager_),
-      facilities_{.clock = clock_,
-                  .workQueues = workQueues_,
-                  .conditions = conditions_,
-                  .log = log_,
-                  .tracePoints = tracePoints_,
-                  .deviceProperties = deviceProperties_,
-                  .defaults = defaults_,
-                  .notifications = *notifications_,
-                  .processFacts = processFacts_,
-                  .processControl = *this,
-                  .tally = tally_,
-                  .fileSystem = fileSystem_,
-                  .localCalendar = localCalendar_,
-                  .randomSource = randomSource_,
-                  .processEnvironment = processEnvironment_,
-                  .commandRunner = commandRunner_,
-                  .wattlog = &wattlog_,
-                  .pylon = &pylon_,
-                  .snare = &snare_,
-                  .tattle = &tattle_,
-                  .gyre = &gyre_,
-                  .flume = &flume_,
-                  .rtcReporting = &rtc_,
-                  .performanceTrace = &performanceTrace_,
-                  .traceAnalysis = &traceAnalysis_,
-                  .perfDataWriters = &perfDataWriters_,
-                  .signposts = &signposts_} {
+      facilities_(facilitiesOf()) {
   // What comes in is held up while what it becomes piles up.
   recorder_.setRoomHandler([this] { connections_.resumeRequests(); });
   workQueues_.setRoomHandler([this] { connections_.resumeRequests(); });
   connections_.gate.setPauseSource([this] { return recorder_.isFull() || workQueues_.isFull(); });
+  loop_.addTurnHook([this] { lookForTheEnd(); });
+}
+
+platform::Facilities LinuxPlatform::facilitiesOf() {
+  const auto standIn = [this](auto& service) { return recorderEnabled_ ? &service : nullptr; };
+  platform::TallyService& tally = recorderEnabled_ ? static_cast<platform::TallyService&>(tally_) : noTally_;
+  return platform::Facilities{.clock = clock_,
+                              .workQueues = workQueues_,
+                              .conditions = conditions_,
+                              .log = log_,
+                              .tracePoints = tracePoints_,
+                              .deviceProperties = deviceProperties_,
+                              .defaults = defaults_,
+                              .notifications = *notifications_,
+                              .processFacts = processFacts_,
+                              .processControl = *this,
+                              .tally = tally,
+                              .fileSystem = fileSystem_,
+                              .localCalendar = localCalendar_,
+                              .randomSource = randomSource_,
+                              .processEnvironment = processEnvironment_,
+                              .commandRunner = commandRunner_,
+                              .wattlog = standIn(wattlog_),
+                              .pylon = standIn(pylon_),
+                              .snare = standIn(snare_),
+                              .tattle = standIn(tattle_),
+                              .gyre = standIn(gyre_),
+                              .flume = &flume_,
+                              .rtcReporting = standIn(rtc_),
+                              .performanceTrace = &performanceTrace_,
+                              .traceAnalysis = &traceAnalysis_,
+                              .perfDataWriters = &perfDataWriters_,
+                              .signposts = &signposts_};
 }
 
 Status LinuxPlatform::start() {
@@ -112,9 +129,11 @@ Status LinuxPlatform::start() {
   if (const Status made = createDirectories(temporaryDirectory_, 0750); made.failed()) {
     return errorOf(temporaryDirectory_, *made);
   }
-  recorder_.start();
-  // A large file is read through first; until that is over nothing could be committed in time.
-  recorder_.waitUntilOpened();
+  if (recorderEnabled_) {
+    recorder_.start();
+    // A large file is read through first; until that is over nothing could be committed in time.
+    recorder_.waitUntilOpened();
+  }
   return {};
 }
 
@@ -134,8 +153,45 @@ Status LinuxPlatform::listen(ListenSocket socket, const std::shared_ptr<platform
   return {};
 }
 
+void LinuxPlatform::endClients(platform::UniqueFunction<void()> clientsAreGone) {
+  if (std::exchange(ending_, true)) return;
+  serviceManager_.notifyStopping(endTime_);
+  logPrefixed(log_, kHostCategory, platform::LogLevel::Default, kModule,
+              "ending: " + std::to_string(connections_.ledger.connectionsOpen) + " connections are open");
+  clientsAreGone_ = std::move(clientsAreGone);
+  endDeadline_.start(endTime_, [this] { giveUpClients(); });
+  listener_->close();
+  connections_.endInputs();
+}
+
+// Once a turn: when the last client's end was served, the loop may stop.
+void LinuxPlatform::lookForTheEnd() {
+  if (!clientsAreGone_ || connections_.ledger.connectionsOpen != 0 || loop_.queue()->ready() != 0) return;
+  // As work of the queue, which is where sessions are stopped.
+  loop_.queue()->async([this, gone = std::exchange(clientsAreGone_, {})]() mutable {
+    gone();
+    loop_.stop();
+  });
+}
+
+// On a thread of its own, while the loop's may be stuck in somebody's work: only what any thread may do.
+void LinuxPlatform::giveUpClients() {
+  serviceManager_.notifyStopping(kLongestCommit);
+  logPrefixed(
+      log_, kHostCategory, platform::LogLevel::Error, kModule,
+      "the clients' ends are not served within " + std::to_string(endTime_.count()) + " ms; what is left is dropped");
+  if (!recorder_.flush(kLongestFlush)) {
+    logPrefixed(log_, kHostCategory, platform::LogLevel::Error, kModule, "not everything could be committed");
+  }
+  if (settleLog_) {
+    settleLog_();
+  }
+  std::_Exit(0);
+}
+
 void LinuxPlatform::serve() {
   loop_.run();
+  endDeadline_.cancel();
   loop_.queue()->run(std::numeric_limits<std::size_t>::max());  // requests that were taken are served
   loop_.flushAll();
   end();
@@ -149,26 +205,30 @@ void LinuxPlatform::exitProcess(int status) {
 
 plist::Dictionary LinuxPlatform::status() {
   const recorder::RecorderCounters counters = recorder_.counters();
-  return connections_.ledger.status(
-      sessionCount_(), loop_.queue()->waiting() + workQueues_.unfinished(),
-      {counters.handedOver, counters.committed, counters.waiting, counters.expired, counters.failed});
+  return connections_.ledger.status(sessionCount_(), loop_.queue()->waiting() + workQueues_.unfinished(),
+                                    {counters.handedOver, counters.committed, counters.waiting, counters.expired,
+                                     counters.failed, counters.lostBefore});
 }
 
 // Takes no more, and makes safe what was taken.
 void LinuxPlatform::end() {
-  serviceManager_.notifyStopping();
+  endDeadline_.cancel();  // of one that is killed while it ends
+  serviceManager_.notifyStopping(kLongestCommit);
   watchdog_.stop();
   listener_->close();
   settleQueues();
   performanceTrace_.shutdown();  // a trace that isn't finished leaves no half file
   recorder_.shutdown();
+  if (settleLog_) {
+    settleLog_();
+  }
 }
 
 // What the workers' own queues hold reaches the recorder too, unless a back-end keeps it waiting.
 void LinuxPlatform::settleQueues() {
   if (const std::size_t left = settleWhileShrinking(workQueues_, settleTime_); left > 0) {
-    hostLog(log_, kHostCategory, platform::LogLevel::Default, kModule,
-            std::to_string(left) + " pieces of work of the workers' queues are left undone");
+    logPrefixed(log_, kHostCategory, platform::LogLevel::Default, kModule,
+                std::to_string(left) + " pieces of work of the workers' queues are left undone");
   }
 }
 

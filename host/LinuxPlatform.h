@@ -2,8 +2,9 @@
 // its stand-ins for the back-ends; it hands them out as Facilities, and knows what holds between them: what comes in is
 // held up while what it becomes piles up, what `status` answers, and in which order all of it ends.
 //
-// Life: start() makes what has threads; listen() lets clients come; serve() lasts until the loop is stopped. The
-// process then ends at once, as it does in exitProcess(): sessions are not stopped, what was taken is made safe.
+// Life: start() makes what has threads; listen() lets clients come; serve() lasts until the loop is stopped, after
+// which what was taken is safe and the process ends at once. endClients() is the end in order: each client's is served
+// as if its connection had closed, then the loop stops. exitProcess() stops no session.
 //
 // Owned by the entry point. Threads: the main loop's, which is the one that calls serve().
 #pragma once
@@ -13,9 +14,11 @@
 #include <string>
 #include <vector>
 
+#include "host/NoTallyService.h"
 #include "host/drivers/AlsaFlume.h"
 #include "host/drivers/FlumeFiles.h"
 #include "host/drivers/LinuxFlumeService.h"
+#include "host/loop/Deadline.h"
 #include "host/loop/LinuxConditions.h"
 #include "host/loop/LinuxWorkQueues.h"
 #include "host/loop/MainLoop.h"
@@ -65,11 +68,12 @@ class LinuxPlatform final : private platform::ProcessControl {
     platform::Clock& clock;
     platform::Log& log;
     ServiceManager& serviceManager;
+    platform::UniqueFunction<void()> settleLog = {};  // the last thing before the process ends
   };
 
   // The state directory is one that prepareStateDirectory() made.
   LinuxPlatform(const HostConfiguration& configuration, const std::string& stateDirectory,
-                JsonDeviceProperties deviceProperties, const Ground& ground);
+                JsonDeviceProperties deviceProperties, Ground ground);
   LinuxPlatform(const LinuxPlatform&) = delete;
   LinuxPlatform& operator=(const LinuxPlatform&) = delete;
   ~LinuxPlatform() override = default;
@@ -83,26 +87,38 @@ class LinuxPlatform final : private platform::ProcessControl {
   // Lets clients connect, once whoever they are handed to is whole.
   [[nodiscard]] Status listen(ListenSocket socket, const std::shared_ptr<platform::ListenerDelegate>& delegate,
                               SessionCount sessionCount);
+  // Takes nobody and nothing more in, serves what each client had sent and then its end, calls `clientsAreGone` and
+  // stops the loop. What isn't over by `HostLimits::endTime` is left: what the recorder holds is committed then and the
+  // process ends with status 0, whatever the queue is at. A second call does nothing. On the loop's thread, from work
+  // or an event of it.
+  void endClients(platform::UniqueFunction<void()> clientsAreGone);
   // Serves until the loop is stopped, then serves the requests that were taken and makes safe what the recorder holds.
   void serve();
 
  private:
   void exitProcess(int status) override;
+  platform::Facilities facilitiesOf();
   plist::Dictionary status();
+  void lookForTheEnd();
+  void giveUpClients();
   void end();
   void settleQueues();
 
   const std::chrono::milliseconds settleTime_;
+  const std::chrono::milliseconds endTime_;
   const std::string temporaryDirectory_;
   platform::Clock& clock_;
   platform::Log& log_;
   ServiceManager& serviceManager_;
+  platform::UniqueFunction<void()> settleLog_;
   MainLoop loop_;
   ConnectionHost connections_;
+  const bool recorderEnabled_;  // false: it never starts, and no stand-in is handed out
   recorder::Recorder recorder_;
   LinuxWorkQueues workQueues_;
   LinuxRandomSource randomSource_;
   recorder::RecorderTallyService tally_;
+  NoTallyService noTally_;
   recorder::RecorderWattlogService wattlog_;
   recorder::RecorderPylonService pylon_;
   recorder::RecorderSnareService snare_;
@@ -129,6 +145,9 @@ class LinuxPlatform final : private platform::ProcessControl {
   Watchdog watchdog_;
   SessionCount sessionCount_;
   std::shared_ptr<SocketListener> listener_;
+  platform::UniqueFunction<void()> clientsAreGone_;  // set while the clients' ends are served
+  bool ending_ = false;
+  Deadline endDeadline_;
   const platform::Facilities facilities_;
 };
 

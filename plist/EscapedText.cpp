@@ -1,7 +1,9 @@
 #include "plist/EscapedText.h"
 
 #include <cstddef>
+#include <optional>
 
+#include "plist/Characters.h"
 #include "plist/Hex.h"
 
 namespace tarn::plist {
@@ -35,6 +37,36 @@ bool isControl(char character) {
   return static_cast<unsigned char>(character) < 0x20;
 }
 
+void appendCodePoint(std::string& out, char32_t character) {
+  out += "\\u";
+  appendHex(out, static_cast<char>(character >> 8U));
+  appendHex(out, static_cast<char>(character & 0xFFU));
+}
+
+// Those above 127 that a terminal or a reader of lines obeys.
+bool isObeyed(char32_t character) {
+  return character < 0xA0 || character == 0x061C || (character >= 0x200E && character <= 0x200F) ||
+         (character >= 0x2028 && character <= 0x202E) || (character >= 0x2066 && character <= 0x2069);
+}
+
+// Takes what begins with a byte that is no plain ASCII character off the front of the text.
+void appendUnusual(std::string& out, std::string_view& text) {
+  const std::string_view before = text;
+  const std::optional<char32_t> character = takeCharacter(text);
+  if (!character) {
+    appendCodePoint(out, static_cast<unsigned char>(text.front()));
+    text.remove_prefix(1);
+  } else if (*character < 0x80 || isObeyed(*character)) {
+    appendCodePoint(out, *character);
+  } else {
+    out.append(before.substr(0, before.size() - text.size()));
+  }
+}
+
+bool isPlain(char character) {
+  return character >= 0x20 && character < 0x7F;
+}
+
 template <class NeedsEscape, class AppendEscape>
 void appendEscaped(std::string& out, std::string_view text, NeedsEscape needsEscape, AppendEscape appendEscape) {
   std::size_t begin = 0;
@@ -52,6 +84,24 @@ void appendEscaped(std::string& out, std::string_view text, NeedsEscape needsEsc
 
 void appendEscapedControls(std::string& out, std::string_view text) {
   appendEscaped(out, text, isControl, [&](char character) { appendControl(out, character); });
+}
+
+void appendPrintable(std::string& out, std::string_view text, LineEnds lineEnds) {
+  while (!text.empty()) {
+    std::size_t plain = 0;
+    while (plain < text.size() && isPlain(text[plain])) {
+      ++plain;
+    }
+    out.append(text.substr(0, plain));
+    text.remove_prefix(plain);
+    if (text.empty()) return;
+    if (text.front() == '\n' && lineEnds != LineEnds::Escaped) {
+      out += lineEnds == LineEnds::Indented ? "\n\t" : "\n";
+      text.remove_prefix(1);
+    } else {
+      appendUnusual(out, text);
+    }
+  }
 }
 
 void appendJsonText(std::string& out, std::string_view text) {

@@ -13,4 +13,15 @@ void appendJsonText(std::string& out, std::string_view text);
 // Appends a text with its control characters escaped as in JSON and all else as it is.
 void appendEscapedControls(std::string& out, std::string_view text);
 
+// What becomes of a line end inside a text that people read.
+enum class LineEnds {
+  Escaped,   // written out like any other control character
+  Indented,  // stays, and a tab stands before what follows
+  Kept,
+};
+// Appends a text so that whoever reads it sees what it is: whatever a terminal or a reader of lines would obey is
+// written as a backslash, u and four hexadecimal digits: the controls (those of Unicode too), the marks that turn the
+// direction of writing, the separators of lines, and bytes that aren't UTF-8. All else stays as it is.
+void appendPrintable(std::string& out, std::string_view text, LineEnds lineEnds);
+
 }  // namespace tarn::plist

@@ -2,8 +2,10 @@
 
 #include <algorithm>
 #include <cstdio>
+#include <utility>
 
 #include "plist/formats/Json.h"
+#include "recorder/store/Remedy.h"
 
 namespace tarn::recorder {
 
@@ -20,78 +22,174 @@ constexpr std::chrono::milliseconds kExpireTime{25};
 // Between two looks at the clock.
 constexpr std::size_t kEventsBetweenLooks = 64;
 // Something that goes wrong again right after it was put right waits for the next try.
-constexpr int kTriesAtOnce = 3;
+constexpr int kTriesAtOnce = 5;
 
-RetentionLimits limitsOf(const RecorderOptions& options) {
-  return {std::max<std::int64_t>(options.maxMegabytes, 1) * kMegabyte, options.maxAgeDays * kSecondsADay};
+std::int64_t capOf(const RecorderOptions& options) {
+  return std::max<std::int64_t>(options.maxMegabytes, 1) * kMegabyte;
 }
 
-// One transaction of a small file must not outgrow what retention keeps free.
+RetentionLimits limitsOf(const RecorderOptions& options) {
+  return {capOf(options), options.maxAgeDays * kSecondsADay};
+}
+
+// One transaction of a small file must not outgrow what retention keeps free; nor may the log, which takes one more
+// than what makes it due to be brought in.
 std::size_t transactionBytes(const RecorderOptions& options) {
-  const auto share = static_cast<std::size_t>(std::max<std::int64_t>(options.maxMegabytes, 1) * kMegabyte / 16);
-  return std::clamp(share, std::size_t{1} << 18, std::size_t{1} << 23);
+  return static_cast<std::size_t>(std::clamp(capOf(options) / 16, std::int64_t{1} << 16, std::int64_t{1} << 23));
+}
+
+std::int64_t logReserve(const RecorderOptions& options) {
+  constexpr std::int64_t kPages = std::int64_t{1} << 17;  // that a transaction touches beside its events
+  return static_cast<std::int64_t>(transactionBytes(options)) * 3 + kPages;
 }
 
 }  // namespace
 
 EventWriter::EventWriter(const RecorderOptions& options, platform::Log& log, const platform::Clock& clock)
-    : options_(options), clock_(clock), log_(log), file_(options.file, limitsOf(options), clock) {}
+    : options_(options),
+      clock_(clock),
+      log_(log),
+      file_(options.file, limitsOf(options), clock, options.boot.empty() ? RecorderTime::currentBoot() : options.boot),
+      usage_(options.file, options.folders, capOf(options)) {
+  file_.setLogLimit(static_cast<std::int64_t>(transactionBytes(options)));
+}
 
 bool EventWriter::open() {
+  Status error;
   for (int tries = 0; tries < kTriesAtOnce; ++tries) {
-    const Outcome outcome = openOnce();
-    if (outcome == Outcome::Done) return true;
-    if (!resolve(outcome)) return false;
+    error = openOnce();
+    if (error.ok()) return true;
+    if (!resolve(*error)) return false;
   }
-  noteFault();
+  noteFault(error->text);
   return false;
 }
 
-Outcome EventWriter::openOnce() {
-  return file_.isOpen() ? Outcome::Done : file_.open();
+Status EventWriter::openOnce() {
+  if (!file_.isOpen()) {
+    if (auto error = file_.open(); error.failed()) return error;
+    tidy();
+    tellWhatOpeningFound();
+  }
+  if (missing_) {
+    if (auto error = noteMissing(); error.failed()) return error;
+  }
+  return carrying_ ? carryOver() : Status();
+}
+
+void EventWriter::tellWhatOpeningFound() {
+  const std::string path = file_.path().string();
+  for (const std::string& name : file_.takePutAside()) {
+    log_.error("recorder file " + path +
+               " had something in its log's place that is no regular file; it is set aside as " + name);
+  }
+  if (const std::int64_t last = file_.takeGoneUpTo(); last > 0) {
+    log_.error("recorder file " + path + " holds nothing of the events up to " + std::to_string(last) +
+               " that were committed: it is new, or its log is gone");
+  }
+  if (const auto missing = file_.takeMissing()) {
+    missing_ = missing;
+    log_.error("recorder file " + path + " misses " + std::to_string(missing->count()) + " committed events (" +
+               textOf({*missing}) + "): its log is damaged, cut or gone");
+  }
+}
+
+Status EventWriter::noteMissing() {
+  Status error = file_.begin();
+  if (error.ok()) {
+    error = file_.noteLoss(*missing_);
+  }
+  if (error.ok()) {
+    error = file_.commit();
+  }
+  if (error.ok()) {
+    missing_.reset();
+  }
+  return error;
+}
+
+void EventWriter::tidy() {
+  if (!carrying_) {
+    for (const std::string& name : usage_.tidy()) {
+      log_.notice("recorder removed " + name + ": its kind is over its share");
+    }
+  }
+  limitDatabase();
+}
+
+void EventWriter::limitDatabase() {
+  file_.setMaxBytes(usage_.databaseBytes(std::max(file_.logBytes(), logReserve(options_))));
+}
+
+void EventWriter::tellLongLog() {
+  const bool isLong = file_.logBytes() >= options_.longLogBytes;
+  if (isLong && !longLogTold_) {
+    std::string readers;
+    for (const std::string& reader : readersOf(file_.path())) {
+      readers += (readers.empty() ? "" : ", ") + reader;
+    }
+    log_.error("recorder file " + file_.path().string() + " has a log of " +
+               std::to_string(file_.logBytes() / kMegabyte) + " MiB, held up by readers of an old state: " +
+               (readers.empty() ? "none that can be seen" : "process " + readers));
+  }
+  longLogTold_ = isLong;
+}
+
+Status EventWriter::carryOver() {
+  if (auto error = carrying_->goOn(file_); error.failed()) return error;
+  const std::string lost = carrying_->lost().empty() ? "none is known to be lost"
+                                                     : std::to_string(countOf(carrying_->lost())) + " are lost (" +
+                                                           textOf(carrying_->lost()) + ")";
+  if (carrying_->carried() > 0 || !carrying_->lost().empty()) {
+    log_.notice("recorder file " + file_.path().string() + " got " + std::to_string(carrying_->carried()) +
+                " events from " + carrying_->from().filename().string() + "; " + lost);
+  }
+  carrying_.reset();
+  tidy();
+  return {};
 }
 
 std::size_t EventWriter::write(const EventBatch& batch, std::size_t from) {
+  Result<std::size_t> written;
   for (int tries = 0; tries < kTriesAtOnce; ++tries) {
-    std::size_t written = 0;
-    const Outcome outcome = writeOnce(batch, from, written);
-    if (outcome == Outcome::Done) return written;
-    if (!resolve(outcome)) return 0;
+    written = writeOnce(batch, from);
+    if (!written.failed()) {
+      suspected_ = false;
+      return written.value;
+    }
+    if (!resolve(*written.error)) return 0;
   }
-  noteFault();
+  noteFault(written.error->text);
   return 0;
 }
 
-Outcome EventWriter::writeOnce(const EventBatch& batch, std::size_t from, std::size_t& written) {
-  Outcome outcome = openOnce();
-  if (outcome == Outcome::Done) {
-    outcome = file_.begin();
-  }
+Result<std::size_t> EventWriter::writeOnce(const EventBatch& batch, std::size_t from) {
+  if (auto error = openOnce(); error.failed()) return {0, error};
+  // What the commit before left in doubt began at the same event.
+  if (const std::int64_t in = file_.takeRowsInDoubt(); in > 0) return {static_cast<std::size_t>(in)};
+  Status error = file_.begin();
   const SteadyClock::time_point start = SteadyClock::now();
   const std::size_t most = transactionBytes(options_);
   std::size_t bytes = 0;
   std::size_t next = from;
-  for (; outcome == Outcome::Done && next < batch.size() && bytes < most; ++next) {
+  for (; error.ok() && next < batch.size() && bytes < most; ++next) {
     const EventBatch::Event& event = batch[next];
     const std::string& payload = payloadText(event.payload);
     detailText_.clear();
     plist::appendJson(detailText_, event.detail);
-    outcome = file_.append({event.time, event.backend, batch.name(event), payload, detailText_});
+    error = file_.append({event.time, event.backend, batch.name(event), payload, detailText_});
     bytes += event.nameSize + payload.size() + detailText_.size() + sizeof(double) * 2;
     if (next % kEventsBetweenLooks == 0 && SteadyClock::now() - start > kInsertTime) {
       bytes = most;
     }
   }
-  if (outcome == Outcome::Done) {
-    outcome = file_.expire(SteadyClock::now() + kExpireTime);
+  if (error.ok()) {
+    error = file_.expire(SteadyClock::now() + kExpireTime);
   }
-  if (outcome == Outcome::Done) {
-    outcome = file_.commit();
+  if (error.ok()) {
+    error = file_.commit();
   }
-  if (outcome == Outcome::Done) {
-    written = next - from;
-  }
-  return outcome;
+  return {error.failed() ? 0 : next - from, error};
 }
 
 // The two events of a message carry one payload, which becomes text once.
@@ -109,9 +207,10 @@ bool EventWriter::settle() {
   lastPayload_ = plist::Dictionary();
   payloadText_ = "{}";
   if (!file_.isOpen()) return true;
-  const Outcome outcome = file_.checkpointIfDue();
-  if (outcome != Outcome::Done) {
-    static_cast<void>(resolve(outcome));
+  limitDatabase();
+  tellLongLog();
+  if (const auto error = file_.checkpointIfDue(); error.failed()) {
+    static_cast<void>(resolve(*error));
     return false;
   }
   if (faulty_) {
@@ -125,61 +224,91 @@ bool EventWriter::settle() {
 }
 
 bool EventWriter::maintain() {
-  const Outcome outcome = maintainOnce();
-  if (outcome == Outcome::Done) return true;
-  return resolve(outcome) && open();
+  const Status error = maintainOnce();
+  if (error.ok()) {
+    suspected_ = false;
+    return true;
+  }
+  return resolve(*error) && open();
 }
 
-Outcome EventWriter::maintainOnce() {
-  Outcome outcome = openOnce();
-  if (outcome == Outcome::Done) {
-    outcome = file_.begin();
+bool EventWriter::verify() {
+  Status error = openOnce();
+  if (error.ok()) {
+    error = file_.verify(SteadyClock::now() + options_.verifyTime);
   }
-  if (outcome == Outcome::Done) {
-    outcome = file_.expire(SteadyClock::now() + kExpireTime);
+  if (error.ok()) return true;
+  if (!resolve(*error)) return false;
+  if (!suspected_) return open();
+  // The second look is at all of it, at once.
+  error = openOnce();
+  if (error.ok()) {
+    error = file_.verify(SteadyClock::time_point::max());
   }
-  if (outcome == Outcome::Done) {
-    outcome = file_.commit();
-  }
-  return outcome;
+  if (error.failed()) return resolve(*error) && open();
+  suspected_ = false;
+  return true;
 }
 
-bool EventWriter::resolve(Outcome outcome) {
-  switch (outcome) {
-    case Outcome::Done:
-      return true;
-    case Outcome::Moved:
-      log_.error("recorder file " + file_.path().string() + " was taken away (" + file_.problem() +
+Status EventWriter::maintainOnce() {
+  Status error = openOnce();
+  if (error.ok()) {
+    tidy();
+  }
+  if (error.ok()) {
+    error = file_.begin();
+  }
+  if (error.ok()) {
+    error = file_.expire(SteadyClock::now() + kExpireTime);
+  }
+  if (error.ok()) {
+    error = file_.commit();
+  }
+  return error;
+}
+
+bool EventWriter::resolve(const Error& error) {
+  switch (remedyFor(error.code)) {
+    case Remedy::Moved:
+      log_.error("recorder file " + file_.path().string() + " was taken away (" + error.text +
                  "); what it held went with it, a fresh one is begun");
       file_.leave();
       return true;
-    case Outcome::SetAside: {
-      const std::string problem = file_.problem();
-      file_.closeAfterFault();
-      const std::filesystem::path aside = file_.setAside();
-      if (!aside.empty()) {
-        log_.error("recorder file " + file_.path().string() + " can't be used (" + problem + "); it is set aside as " +
-                   aside.filename().string() + " and a fresh one is begun");
-        return true;
-      }
-      break;
-    }
-    case Outcome::Reopen:
+    case Remedy::SetAside:
+      return resolveDamage(error);
+    case Remedy::Reopen:
       file_.closeAfterFault();
       break;
-    case Outcome::Wait:
+    case Remedy::Wait:
       break;
   }
-  noteFault();
+  noteFault(error.text);
   return false;
 }
 
-void EventWriter::noteFault() {
+// One look may err: by memory that was short, a read that was cut, a disk that answered wrongly once.
+bool EventWriter::resolveDamage(const Error& error) {
+  file_.closeForAnotherLook();
+  if (!std::exchange(suspected_, true)) return true;
+  const auto aside = file_.setAside();
+  if (aside.failed()) {
+    noteFault(error.text + "; " + aside.error->text);
+    return false;
+  }
+  suspected_ = false;
+  log_.error("recorder file " + file_.path().string() + " can't be used (" + error.text + "); it is set aside as " +
+             aside.value.filename().string() + " and a fresh one is begun");
+  const auto upTo = file_.isInDoubt() ? std::optional(file_.lastId()) : std::nullopt;
+  carrying_ = std::make_unique<CarryOver>(aside.value, upTo);
+  return true;
+}
+
+void EventWriter::noteFault(const std::string& problem) {
+  problem_ = problem;
   if (faulty_) return;
   faulty_ = true;
   faultSince_ = clock_.monotonic();
-  log_.error("recorder can't write to " + file_.path().string() + ": " + file_.problem() +
-             "; events are kept until it can");
+  log_.error("recorder can't write to " + file_.path().string() + ": " + problem + "; events are kept until it can");
 }
 
 }  // namespace tarn::recorder

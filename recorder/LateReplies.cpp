@@ -4,7 +4,7 @@ namespace tarn::recorder {
 
 void LateReplies::close() {
   std::deque<platform::Work> dropped;  // destroyed after the lock: each may hold the last of something
-  const platform::MutexLock lock(line_->mutex);
+  const MutexLock lock(line_->mutex);
   line_->closed = true;
   dropped.swap(line_->waiting);
   while (line_->answering) {
@@ -29,7 +29,7 @@ void LateReplies::enqueue(platform::Work reply) {
 void LateReplies::Line::answerNext() {
   platform::Work reply;
   {
-    const platform::MutexLock lock(mutex);
+    const MutexLock lock(mutex);
     if (waiting.empty()) return;
     reply = std::move(waiting.front());
     waiting.pop_front();
@@ -37,7 +37,7 @@ void LateReplies::Line::answerNext() {
   }
   reply();
   reply.reset();
-  const platform::MutexLock lock(mutex);
+  const MutexLock lock(mutex);
   answering = false;
   answered.notifyAll();
 }

@@ -15,8 +15,8 @@
 #include <string_view>
 #include <utility>
 
-#include "platform/ThreadSafety.h"
 #include "platform/WorkQueue.h"
+#include "plist/ThreadSafety.h"
 
 namespace tarn::recorder {
 
@@ -41,7 +41,7 @@ class LateReplies {
   // The same; `taken` is called when the reply will come, and before it comes.
   template <class Action>
   [[nodiscard]] bool add(platform::Work&& reply, Action taken) {
-    const platform::MutexLock lock(line_->mutex);
+    const MutexLock lock(line_->mutex);
     if (line_->closed || line_->waiting.size() >= manner_.most) return false;
     taken();
     enqueue(std::move(reply));
@@ -50,7 +50,7 @@ class LateReplies {
   // Calls `action` unless it is closed; close() waits for that.
   template <class Action>
   void ifOpen(Action action) {
-    const platform::MutexLock lock(line_->mutex);
+    const MutexLock lock(line_->mutex);
     if (!line_->closed) {
       action();
     }
@@ -63,8 +63,8 @@ class LateReplies {
   struct Line {
     void answerNext();
 
-    platform::Mutex mutex;
-    platform::ConditionVariable answered;
+    Mutex mutex;
+    ConditionVariable answered;
     std::deque<platform::Work> waiting TARN_GUARDED_BY(mutex);
     bool answering TARN_GUARDED_BY(mutex) = false;
     bool closed TARN_GUARDED_BY(mutex) = false;

@@ -22,18 +22,22 @@ Recorder::~Recorder() {
 }
 
 void Recorder::start() {
+  openCounts();  // before anything more is handed over
+  if (left_) {
+    writer_.expect(left_->lastId);
+  }
   thread_ = std::thread([this] { run(); });
 }
 
 void Recorder::waitUntilOpened() {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   done_.wait(mutex_, [this]() TARN_REQUIRES(mutex_) { return opened_; });
 }
 
 void Recorder::shutdown() {
   if (!thread_.joinable()) return;
   {
-    const platform::MutexLock lock(mutex_);
+    const MutexLock lock(mutex_);
     stopping_ = true;
     refusing_ = true;  // from here on events are refused, or a hail of them would put the end off for ever
   }
@@ -47,14 +51,18 @@ void Recorder::record(std::string_view backend, std::string_view name, plist::Di
   bool wake = false;
   bool refused = false;
   {
-    const platform::MutexLock lock(mutex_);
-    ++handedOver_;
+    const MutexLock lock(mutex_);
+    counts_.handOver(before_.handedOver + ++handedOver_);
     if (refusing_) [[unlikely]] {
       ++failed_;
+      keepCounts();
       refused = !std::exchange(refusalLogged_, true);
     } else {
       if (incoming_.empty()) {
         incomingSince_ = SteadyClock::now();
+        if (oldestSince_.load(std::memory_order_relaxed) == 0) {
+          oldestSince_.store(incomingSince_.time_since_epoch().count(), std::memory_order_relaxed);
+        }
       }
       const std::size_t before = incoming_.bytes();
       waitingBytes_ += incoming_.add(backend, name, std::move(payload), std::move(detail), time);
@@ -75,27 +83,91 @@ void Recorder::record(std::string_view backend, std::string_view name, plist::Di
 }
 
 RecorderCounters Recorder::counters() const {
-  const platform::MutexLock lock(mutex_);
-  return {handedOver_, committed_, handedOver_ - committed_ - failed_, expired_, failed_};
+  const MutexLock lock(mutex_);
+  return {handedOver_, committed_, handedOver_ - committed_ - failed_, expired_, failed_, lostBefore_};
+}
+
+bool Recorder::isFull() noexcept {
+  if (full_.load(std::memory_order_relaxed)) return true;
+  const TimePoint::rep since = oldestSince_.load(std::memory_order_relaxed);
+  if (since == 0) return false;
+  const auto age = SteadyClock::now() - TimePoint(TimePoint::duration(since));
+  if (age < options_.oldestWaiting) return false;
+  // What waits now will be committed, and then the room is told.
+  const MutexLock lock(mutex_);
+  if (oldestSince_.load(std::memory_order_relaxed) != since) return false;
+  full_.store(true, std::memory_order_relaxed);
+  return true;
 }
 
 bool Recorder::flush(std::chrono::milliseconds timeout) {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   const std::uint64_t target = handedOver_;
-  ++flushers_;
+  awaited_ = target;
   work_.notifyOne();
   // Events are committed in their order, so the count alone tells.
   const bool done =
       done_.waitFor(mutex_, timeout, [&]() TARN_REQUIRES(mutex_) { return committed_ + failed_ >= target; });
-  --flushers_;
   return done && failed_ == 0;
+}
+
+void Recorder::settle(std::shared_ptr<platform::WorkQueue> queue, platform::Work done) {
+  {
+    const MutexLock lock(mutex_);
+    if (failed_ > 0) return;  // nothing will be whole again
+    if (committed_ != handedOver_) {
+      awaited_ = handedOver_;
+      settling_.push_back({handedOver_, std::move(queue), std::move(done)});
+      work_.notifyOne();
+      return;
+    }
+  }
+  queue->async(std::move(done));
+}
+
+void Recorder::openCounts() {
+  const MutexLock lock(mutex_);
+  std::filesystem::path file = options_.file;
+  file += ".counts";
+  const auto opened = counts_.open(file);
+  const bool isFirst = !countsOpen_ && committed_ == 0;
+  countsOpen_ = !opened.failed();
+  if (!countsOpen_) return;
+  if (isFirst && opened.value) {
+    left_ = before_ = *opened.value;
+    lastId_ = before_.lastId;
+  }
+  keepCounts();
+}
+
+void Recorder::keepCounts() {
+  counts_.keep({before_.handedOver + handedOver_, before_.committed + committed_, before_.failed + failed_, lastId_});
+}
+
+// Ids are given in the order of hand-over, so the file's last one tells how many of the run before are in it.
+void Recorder::tellWhatWasLost() {
+  const HandOverCounts left = *std::exchange(left_, std::nullopt);
+  const MutexLock lock(mutex_);
+  const std::int64_t in = writer_.lastId() - left.lastId - static_cast<std::int64_t>(committed_);
+  const std::uint64_t known = left.committed + left.failed + static_cast<std::uint64_t>(std::max<std::int64_t>(in, 0));
+  lostBefore_ = left.handedOver > known ? left.handedOver - known : 0;
+  if (lostBefore_ > 0) {
+    log_.error("recorder lost " + std::to_string(lostBefore_) +
+               " events that were handed over to the run before and not committed when it ended");
+  }
+  before_ = {};
+  lastId_ = writer_.lastId();
+  keepCounts();
 }
 
 void Recorder::run() {
   bool healthy = writer_.open() && writer_.settle();
+  if (healthy && left_) {
+    tellWhatWasLost();
+  }
   int triesLeft = options_.shutdownTries;
   {
-    const platform::MutexLock lock(mutex_);
+    const MutexLock lock(mutex_);
     opened_ = true;
     done_.notifyAll();
     for (;;) {
@@ -103,9 +175,23 @@ void Recorder::run() {
       if (stopping_ && (!hasWaiting() || triesLeft == 0)) break;
       if (position_ == current_.size() && !incoming_.empty()) {
         current_.swap(incoming_);
+        currentSince_ = incomingSince_;
+        busy_ = current_.size() >= options_.busyGroupEvents;
         position_ = 0;
       }
-      healthy = position_ < current_.size() ? writeCurrent() : maintain();
+      if (position_ < current_.size()) {
+        healthy = writeCurrent();
+      } else if (!healthy || SteadyClock::now() >= nextMaintenance_) {
+        healthy = maintain();
+      }
+      if (healthy && left_) {
+        mutex_.unlock();
+        tellWhatWasLost();
+        mutex_.lock();
+      }
+      if (healthy && SteadyClock::now() >= nextVerification_) {
+        healthy = verify();
+      }
       if (stopping_ && !healthy) {
         --triesLeft;
       }
@@ -120,7 +206,7 @@ void Recorder::waitForWork() {
   if (position_ < current_.size()) return;
   while (incoming_.empty() && !stopping_) {
     asleep_ = true;
-    const bool due = !work_.waitUntil(mutex_, nextMaintenance_);
+    const bool due = !work_.waitUntil(mutex_, std::min(nextMaintenance_, nextVerification_));
     asleep_ = false;
     if (due && incoming_.empty()) return;
   }
@@ -129,8 +215,8 @@ void Recorder::waitForWork() {
 
 // Company for a commit comes cheap, as long as it doesn't keep the first event waiting.
 void Recorder::gather() {
-  const TimePoint latest = incomingSince_ + options_.groupTime;
-  while (!stopping_ && flushers_ == 0 && incoming_.size() < options_.groupEvents &&
+  const TimePoint latest = incomingSince_ + (busy_ ? options_.busyGroupTime : options_.groupTime);
+  while (!stopping_ && !isAwaited() && incoming_.size() < options_.groupEvents &&
          incoming_.bytes() < options_.groupBytes) {
     const TimePoint now = SteadyClock::now();
     if (now >= latest) return;
@@ -174,6 +260,34 @@ bool Recorder::writeCurrent() {
   return healthy;
 }
 
+// A piece at a time, then a long rest: what it costs stays below a hundredth of the time.
+bool Recorder::verify() {
+  mutex_.unlock();
+  const bool healthy = writer_.verify();
+  const auto pause = writer_.isVerified() ? options_.verifyRest : options_.verifyInterval;
+  nextVerification_ = SteadyClock::now() + pause;
+  mutex_.lock();
+  return healthy;
+}
+
+void Recorder::noteOldest() {
+  TimePoint::rep since = 0;
+  if (position_ < current_.size()) {
+    since = currentSince_.time_since_epoch().count();
+  } else if (!incoming_.empty()) {
+    since = incomingSince_.time_since_epoch().count();
+  }
+  oldestSince_.store(since, std::memory_order_relaxed);
+}
+
+bool Recorder::hasRoom() const {
+  const TimePoint::rep since = oldestSince_.load(std::memory_order_relaxed);
+  const auto age =
+      since == 0 ? TimePoint::duration::zero() : SteadyClock::now() - TimePoint(TimePoint::duration(since));
+  return handedOver_ - committed_ - failed_ <= options_.lowWaterEvents && waitingBytes_ <= options_.lowWaterBytes &&
+         age < options_.oldestWaiting;
+}
+
 bool Recorder::maintain() {
   mutex_.unlock();
   const bool healthy = writer_.maintain() && writer_.settle();
@@ -189,11 +303,19 @@ void Recorder::account(std::size_t events, std::size_t bytes) {
   committed_ += events;
   waitingBytes_ -= bytes;
   expired_ = writer_.expired();
+  if (events > 0) {
+    lastId_ = writer_.lastId();
+    noteOldest();
+    if (!countsOpen_ || counts_.isTorn()) {
+      mutex_.unlock();
+      openCounts();
+      mutex_.lock();
+    }
+    keepCounts();
+  }
   done_.notifyAll();
-  const bool hasRoom = full_.load(std::memory_order_relaxed) &&
-                       handedOver_ - committed_ - failed_ <= options_.lowWaterEvents &&
-                       waitingBytes_ <= options_.lowWaterBytes;
-  if (hasRoom) {
+  answerSettled();
+  if (full_.load(std::memory_order_relaxed) && hasRoom()) {
     full_.store(false, std::memory_order_relaxed);
     if (roomHandler_) {
       mutex_.unlock();
@@ -203,20 +325,36 @@ void Recorder::account(std::size_t events, std::size_t bytes) {
   }
 }
 
+// Called locked, and returns so; queues are called without the lock.
+void Recorder::answerSettled() {
+  while (!settling_.empty() && settling_.front().handedOver <= committed_) {
+    Settling settled = std::move(settling_.front());
+    settling_.pop_front();
+    mutex_.unlock();
+    settled.queue->async(std::move(settled.done));
+    mutex_.lock();
+  }
+}
+
 void Recorder::giveUp() {
+  std::deque<Settling> unanswered;
+  unanswered.swap(settling_);
   const std::uint64_t lost = handedOver_ - committed_ - failed_;
   failed_ += lost;
+  keepCounts();
   waitingBytes_ = 0;
   incoming_.clear();
   opened_ = true;
+  oldestSince_.store(0, std::memory_order_relaxed);
   full_.store(false, std::memory_order_relaxed);
   done_.notifyAll();
+  mutex_.unlock();
+  unanswered.clear();  // each may hold the last of something
   if (lost > 0) {
-    mutex_.unlock();
     log_.error("recorder gives up " + std::to_string(lost) + " events that could not be written to " +
                options_.file.string() + ": " + writer_.problem());
-    mutex_.lock();
   }
+  mutex_.lock();
 }
 
 }  // namespace tarn::recorder

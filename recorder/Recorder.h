@@ -2,7 +2,8 @@
 // events(id, time, backend, name, payload, detail), readable while it is written.
 //
 // Owner: the platform. start() makes the writer thread, shutdown() ends it; in between nothing that was handed over
-// is lost. Events are committed in groups, at most 200 ms after their hand-over while the disk is well.
+// is lost. Events are committed in groups, at most 200 ms after their hand-over while the disk is well. How many were
+// handed over is kept in a mapped file beside the database, so that the run after a kill knows how many it cost.
 //
 // record() takes a short lock and counts references: no text is formed, no system call is made while a commit is being
 // gathered. It never drops an event and never waits for the disk; so that what waits stays bounded, whoever takes
@@ -13,18 +14,23 @@
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
+#include <deque>
+#include <memory>
+#include <optional>
 #include <string_view>
 #include <thread>
 #include <utility>
 
 #include "platform/Clock.h"
 #include "platform/Log.h"
-#include "platform/ThreadSafety.h"
 #include "platform/UniqueFunction.h"
+#include "platform/WorkQueue.h"
 #include "plist/Dictionary.h"
+#include "plist/ThreadSafety.h"
 #include "recorder/EventWriter.h"
 #include "recorder/RecorderOptions.h"
 #include "recorder/store/EventBatch.h"
+#include "recorder/store/HandOverPage.h"
 
 namespace tarn::recorder {
 
@@ -35,6 +41,8 @@ struct RecorderCounters {
   std::uint64_t waiting = 0;
   std::uint64_t expired = 0;  // removed by retention
   std::uint64_t failed = 0;   // given up at a shutdown, by a disk that never came back
+  // Of the run before: handed over and never committed, because it was killed or the machine stopped.
+  std::uint64_t lostBefore = 0;
 };
 
 class Recorder {
@@ -61,26 +69,45 @@ class Recorder {
   // Behind shutdown() the event counts as failed. Threads: any.
   void record(std::string_view backend, std::string_view name, plist::Dictionary payload, plist::Dictionary detail,
               double time);
-  // Whether events should not be brought in for now. Threads: any.
-  bool isFull() const noexcept { return full_.load(std::memory_order_relaxed); }
+  // Whether events should not be brought in for now: too many wait, or the oldest for too long. Threads: any.
+  bool isFull() noexcept;
   // All counters of one moment. Threads: any.
   RecorderCounters counters() const;
   // Commits what was handed over before the call without waiting for company. Whether all of it is committed; false
   // when the time is up or when it was given up. Threads: any but the writer's.
   [[nodiscard]] bool flush(std::chrono::milliseconds timeout);
+  // The same without waiting here: once all that was handed over before the call is committed, `done` becomes work of
+  // the queue (at once when it is committed already), in the order of the calls. Destroyed uncalled when some of it is
+  // given up at a shutdown. Threads: any.
+  void settle(std::shared_ptr<platform::WorkQueue> queue, platform::Work done);
 
  private:
   using TimePoint = std::chrono::steady_clock::time_point;
 
+  // One that waits for a commit.
+  struct Settling {
+    std::uint64_t handedOver;  // committed when so many are
+    std::shared_ptr<platform::WorkQueue> queue;
+    platform::Work done;
+  };
+
   void run();
+  void keepCounts() TARN_REQUIRES(mutex_);
+  void openCounts();
+  void tellWhatWasLost();
   void waitForWork() TARN_REQUIRES(mutex_);
   void gather() TARN_REQUIRES(mutex_);
   void waitForRetry() TARN_REQUIRES(mutex_);
   bool writeCurrent() TARN_REQUIRES(mutex_);
   bool maintain() TARN_REQUIRES(mutex_);
+  bool verify() TARN_REQUIRES(mutex_);
+  void noteOldest() TARN_REQUIRES(mutex_);
+  bool hasRoom() const TARN_REQUIRES(mutex_);
   void account(std::size_t events, std::size_t bytes) TARN_REQUIRES(mutex_);
+  void answerSettled() TARN_REQUIRES(mutex_);
   void giveUp() TARN_REQUIRES(mutex_);
   bool hasWaiting() const noexcept TARN_REQUIRES(mutex_) { return committed_ + failed_ != handedOver_; }
+  bool isAwaited() const noexcept TARN_REQUIRES(mutex_) { return committed_ < awaited_; }
 
   const RecorderOptions options_;
   RecorderLog log_;
@@ -93,11 +120,16 @@ class Recorder {
   std::size_t position_ = 0;  // in current_: what stands before it is committed
   std::chrono::milliseconds retry_;
   TimePoint nextMaintenance_;
+  TimePoint nextVerification_;
+  TimePoint currentSince_;              // of the first event in current_
+  std::optional<HandOverCounts> left_;  // by the run before, until its loss is told
 
   std::atomic<bool> full_{false};
-  mutable platform::Mutex mutex_;
-  platform::ConditionVariable work_;  // for the writer thread
-  platform::ConditionVariable done_;  // for those who wait for it
+  // Of the oldest event that waits, in the steady clock's ticks; 0 when none does.
+  std::atomic<TimePoint::rep> oldestSince_{0};
+  mutable Mutex mutex_;
+  ConditionVariable work_;  // for the writer thread
+  ConditionVariable done_;  // for those who wait for it
   EventBatch incoming_ TARN_GUARDED_BY(mutex_);
   TimePoint incomingSince_ TARN_GUARDED_BY(mutex_);
   std::size_t waitingBytes_ TARN_GUARDED_BY(mutex_) = 0;
@@ -105,7 +137,14 @@ class Recorder {
   std::uint64_t committed_ TARN_GUARDED_BY(mutex_) = 0;
   std::uint64_t failed_ TARN_GUARDED_BY(mutex_) = 0;
   std::uint64_t expired_ TARN_GUARDED_BY(mutex_) = 0;
-  int flushers_ TARN_GUARDED_BY(mutex_) = 0;
+  std::uint64_t lostBefore_ TARN_GUARDED_BY(mutex_) = 0;
+  HandOverPage counts_ TARN_GUARDED_BY(mutex_);
+  HandOverCounts before_ TARN_GUARDED_BY(mutex_);    // counted along until the loss of the run before is told
+  std::int64_t lastId_ TARN_GUARDED_BY(mutex_) = 0;  // of the last committed event
+  bool countsOpen_ TARN_GUARDED_BY(mutex_) = false;
+  bool busy_ TARN_GUARDED_BY(mutex_) = false;          // the last group was large
+  std::uint64_t awaited_ TARN_GUARDED_BY(mutex_) = 0;  // handed over before the last flush() or settle()
+  std::deque<Settling> settling_ TARN_GUARDED_BY(mutex_);
   bool asleep_ TARN_GUARDED_BY(mutex_) = false;  // the writer waits for the first event of a group
   bool opened_ TARN_GUARDED_BY(mutex_) = false;
   bool stopping_ TARN_GUARDED_BY(mutex_) = false;

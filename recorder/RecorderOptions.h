@@ -5,22 +5,28 @@
 #include <cstddef>
 #include <cstdint>
 #include <filesystem>
+#include <string>
+#include <vector>
 
 namespace tarn::recorder {
 
 struct RecorderOptions {
   std::filesystem::path file;
 
-  // Retention: beyond either, the oldest events go first. A megabyte is 2^20 bytes; at least one is kept.
+  // Retention: beyond either, the oldest events go first. A megabyte is 2^20 bytes; at least one is kept. The size is
+  // that of the database with its log, of files set aside, and of the files in these folders; see StateUsage.
   std::int64_t maxMegabytes = 256;
+  std::vector<std::filesystem::path> folders;
   double maxAgeDays = 30;
   // How often an idle recorder looks for events that have grown too old.
   std::chrono::milliseconds maintenanceInterval{60'000};
 
   // Commits: a group is written this long after its first event at the latest, earlier when nothing new has come for
-  // the quiet time or when the group is large.
-  std::chrono::milliseconds groupTime{100};
-  std::chrono::milliseconds quietTime{20};
+  // the quiet time or when the group is large. While many come, company is worth more time.
+  std::chrono::milliseconds groupTime{4};
+  std::chrono::milliseconds quietTime{1};
+  std::chrono::milliseconds busyGroupTime{20};
+  std::size_t busyGroupEvents = 512;
   std::size_t groupEvents = 4096;
   std::size_t groupBytes = std::size_t{4} << 20;
 
@@ -30,6 +36,22 @@ struct RecorderOptions {
   std::size_t lowWaterEvents = 8'192;
   std::size_t highWaterBytes = std::size_t{16} << 20;
   std::size_t lowWaterBytes = std::size_t{8} << 20;
+
+  // From this age of the oldest waiting event on isFull() is true too: with the time of a commit it is within what a
+  // crash may cost.
+  std::chrono::milliseconds oldestWaiting{100};
+
+  // How often a piece of the file is compared with its checksums, and for how long: half of a hundredth of the time.
+  // After the last piece nothing is compared for the rest.
+  std::chrono::milliseconds verifyInterval{1000};
+  std::chrono::milliseconds verifyTime{5};
+  std::chrono::milliseconds verifyRest{6 * 3'600'000};
+
+  // A log beyond this is told, with the readers that hold it up.
+  std::int64_t longLogBytes = std::int64_t{64} << 20;
+
+  // What tells this boot of the system from others; the kernel's own name for it when empty.
+  std::string boot;
 
   // After a fault the next try comes after the first pause, each further one after twice as long, up to the last.
   std::chrono::milliseconds firstRetry{250};

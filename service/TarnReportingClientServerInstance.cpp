@@ -329,6 +329,9 @@ void TarnReportingClientServerInstance::endClient() {
   const bool isListed =
       std::any_of(clients.begin(), clients.end(), [&](const auto& client) { return client.get() == this; });
   if (!isListed) return;
+  if (const auto end = service->clientEnd(); end != TarnReportingClientEnd::ClientGone) {
+    kLog(LogLevel::Default, "ending client %i. reason=%s", processIdentifier_, TarnReportingClientEndName(end));
+  }
   sessions_.forEach([](std::int64_t, const std::shared_ptr<TarnReportingSession>& session) {
     if (session->started()) {
       session->stop();

@@ -63,6 +63,10 @@ std::int64_t uptimeOf(const TarnReportingClientServerInstance& client) {
 
 }  // namespace
 
+std::string_view TarnReportingClientEndName(TarnReportingClientEnd end) noexcept {
+  return end == TarnReportingClientEnd::ClientGone ? "client-gone" : "service-stopping";
+}
+
 std::shared_ptr<TarnReportingService> TarnReportingService::create() {
   struct Constructible : TarnReportingService {};
   auto service = std::make_shared<Constructible>();
@@ -184,6 +188,17 @@ void TarnReportingService::removeClient(const TarnReportingClientServerInstance&
   }
 }
 
+void TarnReportingService::announceEnd() {
+  clientEnd_ = TarnReportingClientEnd::ServiceStopping;
+}
+
+void TarnReportingService::endSingleMessageSession() {
+  if (singleMessageSession_) {
+    singleMessageSession_->stop();
+    singleMessageSession_.reset();
+  }
+}
+
 void TarnReportingService::logReportingSessions() {
   const Sessions active = getAllActiveReportingSessions();
   kLog(LogLevel::Default, "%ld active reporting session(s) %@", active.size(), [&] { return descriptions(active); });
@@ -225,6 +240,9 @@ void TarnReportingService::queueStopSingleSession(std::chrono::nanoseconds delay
 }
 
 void TarnReportingService::checkSingleSession() {
+  if (!singleMessageSession_) {
+    return;  // it ended with the service
+  }
   const std::chrono::duration<double> idle =
       TarnReportingFacilities().clock.monotonic() - singleMessageSessionLastRetrieved_;
   if (idle > kTimeout) {

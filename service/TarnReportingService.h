@@ -46,6 +46,13 @@ class TarnReportingService : public TarnReportingServiceDelegateProtocol,
   Sessions findReportingSessionsForIDs(const platform::ReporterIDs& reporterIDs) override;
   void removeClient(const TarnReportingClientServerInstance& client) override;
   void logReportingSessions() override;
+  TarnReportingClientEnd clientEnd() const override { return clientEnd_; }
+
+  // The process is about to end in order: clients that end from now on do so for that reason. On the server queue.
+  void announceEnd();
+  // Stops the single-message session, for which no client speaks. Called once the clients are gone, on the server
+  // queue; nothing comes in any more then.
+  void endSingleMessageSession();
 
   // Sessions that exist now, the single-message session included.
   std::size_t sessionCount() const;
@@ -63,6 +70,7 @@ class TarnReportingService : public TarnReportingServiceDelegateProtocol,
   Clients clients_ TARN_GUARDED_BY(mutex_);  // changed on the server queue alone
 
   // Server queue only.
+  TarnReportingClientEnd clientEnd_ = TarnReportingClientEnd::ClientGone;
   std::shared_ptr<TarnReportingSession> singleMessageSession_;
   std::chrono::nanoseconds singleMessageSessionLastRetrieved_{};  // on the monotonic clock
 };

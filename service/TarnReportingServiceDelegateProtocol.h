@@ -5,6 +5,7 @@
 
 #include <cstdint>
 #include <memory>
+#include <string_view>
 #include <vector>
 
 #include "platform/TarnReportingServiceProtocol.h"
@@ -13,6 +14,13 @@ namespace tarn {
 
 class TarnReportingClientServerInstance;
 class TarnReportingSession;
+
+// Why a client ends, and its sessions with it.
+enum class TarnReportingClientEnd : std::uint8_t {
+  ClientGone,       // its connection is over
+  ServiceStopping,  // the process ends in order
+};
+std::string_view TarnReportingClientEndName(TarnReportingClientEnd end) noexcept;
 
 class TarnReportingServiceDelegateProtocol {
  public:
@@ -31,6 +39,8 @@ class TarnReportingServiceDelegateProtocol {
   virtual Sessions findReportingSessionsForIDs(const platform::ReporterIDs& reporterIDs) = 0;
   virtual void removeClient(const TarnReportingClientServerInstance& client) = 0;
   virtual void logReportingSessions() = 0;
+  // Why a client that ends now does.
+  virtual TarnReportingClientEnd clientEnd() const = 0;
 };
 
 }  // namespace tarn

@@ -8,7 +8,7 @@
 
 namespace tarn {
 
-// All 17, in order. The table is static. Threads: any.
+// All of them, in order. The table is static. Threads: any.
 std::span<const TarnReportingSessionWorkerClass> TarnReportingWorkerClasses();
 
 }  // namespace tarn

@@ -1,7 +1,7 @@
 // tarnreportingd: options, platform, service, serve. It owns no behaviour; what a part does is told where the part is.
 //
-// The process ends without tearing the parts down: what the back-ends hold is committed, then it exits at once.
-// Sessions are not stopped.
+// A signal ends the clients in order, with their sessions. The process then ends without tearing the parts down: what
+// the back-ends hold is committed, then it exits at once.
 #include <cstdint>
 #include <cstdlib>
 #include <iostream>
@@ -12,7 +12,7 @@
 #include "derived/TarnReportingSystemMonitor.h"
 #include "host/HostSetup.h"
 #include "host/LinuxPlatform.h"
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 #include "host/loop/ServiceManager.h"
 #include "host/loop/SignalSource.h"
 #include "host/settings/HostPaths.h"
@@ -39,8 +39,8 @@ std::shared_ptr<TarnReportingService> makeService(platform::Log& log) {
   TarnReportingSession::setAllWorkerClasses(TarnReportingWorkerClasses());
   std::shared_ptr<TarnReportingService> service = TarnReportingService::create();
   if (TarnReportingSystemMonitor::TarnReportingDefaults()["disable_reporting"].asBool()) {
-    hostLog(log, kHostCategory, platform::LogLevel::Default, kModule,
-            "reporting is disabled by the service's defaults");
+    logPrefixed(log, kHostCategory, platform::LogLevel::Default, kModule,
+                "reporting is disabled by the service's defaults");
     service->setReportingEnabled(false);
   }
   return service;
@@ -50,10 +50,15 @@ std::shared_ptr<TarnReportingService> makeService(platform::Log& log) {
 int serve(LinuxPlatform& platform, HostSetup& setup) {
   MainLoop& loop = platform.loop();
   if (const Status started = platform.start(); started.failed()) return refuse(started->text);
-  const Status heard = SignalSource::start(setup.signals, loop, [&loop](int) { loop.stop(); });
+  std::shared_ptr<TarnReportingService> service;  // before any signal is served
+  const auto endInOrder = [&platform, &service](int) {
+    service->announceEnd();
+    platform.endClients([&service] { service->endSingleMessageSession(); });
+  };
+  const Status heard = SignalSource::start(setup.signals, loop, endInOrder);
   if (heard.failed()) return refuse(heard->text);
   TarnReportingInstallFacilities(&platform.facilities());
-  const std::shared_ptr<TarnReportingService> service = makeService(*setup.log);
+  service = makeService(*setup.log);
   // Only now is there anything to connect to: who can reach the service finds it whole, its notifications heard.
   const Status listening =
       platform.listen(std::move(setup.socket), service, [&service] { return service->sessionCount(); });
@@ -77,6 +82,8 @@ int main(int argumentCount, char** arguments) {
   }
   ServiceManager serviceManager;
   LinuxPlatform platform(setup.configuration, command.options->stateDirectory, setup.deviceProperties,
-                         {setup.clock, *setup.log, serviceManager});
-  std::_Exit(serve(platform, setup));  // other threads still use the platform's parts
+                         {setup.clock, *setup.log, serviceManager, [&setup] { setup.settleLog(); }});
+  const int status = serve(platform, setup);
+  setup.settleLog();
+  std::_Exit(status);  // other threads still use the platform's parts
 }

@@ -72,7 +72,7 @@ class Platform {
 // A trace as the service leaves one; its path.
 std::string writeTrace(const std::string& directory, std::size_t events) {
   linux_host::TraceFile file({directory, "trace.json", "trace-1", 2, false, std::size_t{1} << 30U, 0});
-  if (file.open()) {
+  if (file.open().failed()) {
     fail("can't write a trace");
   }
   linux_host::SignpostRecord record;

@@ -5,7 +5,7 @@
 #include <numeric>
 #include <utility>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 #include "host/system/FolderNames.h"
 #include "host/system/SmallFile.h"
 #include "host/system/SystemError.h"
@@ -85,7 +85,7 @@ FlumeSamples AlsaFlume::read() {
     if (const auto before = complaints_.find(path); before == complaints_.end() || before->second != *taken) {
       std::string text = "driver channels: the substream ";
       text.append(path).append(" ").append(taken->text);
-      hostLog(log_, kDriverCategory, platform::LogLevel::Error, kModule, text);
+      logPrefixed(log_, kDriverCategory, platform::LogLevel::Error, kModule, text);
     }
     complaints.emplace(path, *taken);
   }
@@ -118,9 +118,9 @@ std::vector<AlsaFlume::Substream> AlsaFlume::substreams() {
     }
   }
   if (!complete && !std::exchange(toldBounds_, true)) {
-    hostLog(log_, kDriverCategory, platform::LogLevel::Error, kModule,
-            "driver channels: there are more than " + std::to_string(kMostSubstreams) +
-                " PCM substreams, the others are left out");
+    logPrefixed(log_, kDriverCategory, platform::LogLevel::Error, kModule,
+                "driver channels: there are more than " + std::to_string(kMostSubstreams) +
+                    " PCM substreams, the others are left out");
   }
   return found;
 }

@@ -6,7 +6,7 @@
 #include <iterator>
 #include <utility>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 #include "host/system/FolderNames.h"
 #include "host/system/SmallFile.h"
 #include "host/system/SystemError.h"
@@ -119,7 +119,7 @@ void FlumeFiles::complain(const std::string& name, const Error& complaint) const
   plist::appendEscapedControls(text, name.empty() ? folder_ : name);
   text += ' ';
   text += complaint.text;
-  hostLog(log_, kDriverCategory, platform::LogLevel::Error, kModule, text);
+  logPrefixed(log_, kDriverCategory, platform::LogLevel::Error, kModule, text);
 }
 
 }  // namespace tarn::linux_host

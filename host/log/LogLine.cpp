@@ -6,6 +6,7 @@
 #include <cstdio>
 
 #include "plist/CalendarDate.h"
+#include "plist/EscapedText.h"
 
 namespace tarn::linux_host {
 
@@ -52,7 +53,7 @@ std::string logLine(double epochSeconds, const platform::LogEntry& entry) {
   line += ' ';
   line += entry.category.code;
   line += ' ';
-  line += entry.text;
+  plist::appendPrintable(line, entry.text, plist::LineEnds::Indented);
   line += '\n';
   return line;
 }

@@ -17,7 +17,8 @@ std::optional<platform::LogLevel> logLevelFromName(std::string_view name) noexce
 // "2026-11-20T10:00:00.123456Z"
 std::string logTime(double epochSeconds);
 
-// The whole entry with its line end. Further lines of its text follow as they are.
+// The whole entry with its line end. Further lines of its text follow, each after a tab; other control characters of it
+// are written out, so that no text can look like an entry of its own.
 std::string logLine(double epochSeconds, const platform::LogEntry& entry);
 
 }  // namespace tarn::linux_host

@@ -4,26 +4,46 @@
 
 #include <utility>
 
-#include "host/log/FileLog.h"
-#include "host/log/HostLog.h"
-#include "host/log/JournalLog.h"
+#include "host/log/FileOutput.h"
+#include "host/log/LineOutput.h"
+#include "host/log/PrefixedLog.h"
 
 namespace tarn::linux_host {
 
-OpenedLog openLog(std::string_view target, platform::LogLevel threshold, const platform::Clock& clock) {
-  if (target == "stderr") return {std::make_unique<StreamLog>(STDERR_FILENO, clock, threshold), {}};
+namespace {
+
+constexpr std::string_view kModule = "LogTarget";
+
+}  // namespace
+
+Result<std::unique_ptr<QueuedLog>> openLog(std::string_view target, platform::LogLevel threshold,
+                                           const platform::Clock& clock, const std::string& journalSocket) {
+  std::unique_ptr<LogOutput> output;
+  std::string fallback;
   if (target == "journal") {
-    if (const auto reason = JournalLog::unavailable(); reason.failed()) {
-      return {nullptr, "no journal on this machine: " + reason->text};
+    auto journal = std::make_unique<JournalOutput>(journalSocket);
+    if (const auto error = journal->open(); error.failed()) {
+      fallback = "no journal on this machine, the log goes to the standard error stream" + errorSuffix(*error);
+    } else {
+      output = std::move(journal);
     }
-    return {std::make_unique<JournalLog>(threshold), {}};
+  } else if (target != "stderr") {
+    const std::string path(target);
+    auto file = std::make_unique<FileOutput>(path);
+    if (const Status opened = file->open(); opened.failed()) {
+      return {nullptr, Error{opened.code(), "cannot open log file " + path + errorSuffix(*opened)}};
+    }
+    output = std::move(file);
   }
-  const std::string path(target);
-  auto file = std::make_unique<FileLog>(path, clock, threshold);
-  if (const auto error = file->open(); error.failed()) {
-    return {nullptr, "cannot open log file " + path + errorSuffix(*error)};
+  if (!output) {
+    output = std::make_unique<StreamOutput>(STDERR_FILENO);
   }
-  return {std::move(file), {}};
+  auto log = std::make_unique<QueuedLog>(std::move(output), clock, threshold);
+  log->start();
+  if (!fallback.empty()) {
+    logPrefixed(*log, kHostCategory, platform::LogLevel::Error, kModule, fallback);
+  }
+  return {std::move(log), {}};
 }
 
 }  // namespace tarn::linux_host

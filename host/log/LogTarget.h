@@ -1,24 +1,20 @@
-// openLog: makes the log sink that a target names. Threads: one at a time.
+// openLog: makes the log that a target names. Threads: one at a time.
 #pragma once
 
 #include <memory>
 #include <string>
 #include <string_view>
 
-#include "platform/Log.h"
-
-namespace tarn::platform {
-class Clock;
-}
+#include "host/log/JournalOutput.h"
+#include "host/log/QueuedLog.h"
+#include "plist/Result.h"
 
 namespace tarn::linux_host {
 
-struct OpenedLog {
-  std::unique_ptr<platform::Log> log;  // null when it can't be made
-  std::string error;                   // why not, with the target's name
-};
-
-// `target` is "stderr", "journal" or a file's path. The clock must outlive the sink.
-OpenedLog openLog(std::string_view target, platform::LogLevel threshold, const platform::Clock& clock);
+// `target` is "stderr", "journal" or a file's path. Where there is no journal the standard error stream takes its
+// place, with a line that says so; a file that can't be opened is an error, with its name. The clock outlives the log.
+Result<std::unique_ptr<QueuedLog>> openLog(std::string_view target, platform::LogLevel threshold,
+                                           const platform::Clock& clock,
+                                           const std::string& journalSocket = JournalOutput::kSocket);
 
 }  // namespace tarn::linux_host

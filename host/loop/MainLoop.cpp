@@ -97,7 +97,7 @@ void MainLoop::waitForEvents() {
   progress_.setIdle(true);
   const std::size_t count = sleep(events, timeout);
   progress_.setIdle(false);
-  progress_.step();
+  progress_.turn();
   dispatchAll({events.data(), count});
 }
 

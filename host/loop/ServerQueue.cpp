@@ -22,8 +22,8 @@ ServerQueue::ServerQueue(const platform::Clock& clock, QueueProgress& progress)
 void ServerQueue::async(platform::Work work) {
   bool wakeServer = false;
   {
-    const platform::MutexLock lock(mutex_);
-    incoming_.push_back(std::move(work));
+    const MutexLock lock(mutex_);
+    incoming_.push_back({std::move(work), LogClientScope::current()});
     ready_.fetch_add(1, std::memory_order_relaxed);
     wakeServer = mustWake();
   }
@@ -40,8 +40,8 @@ void ServerQueue::asyncAfter(std::chrono::nanoseconds delay, platform::Work work
   const auto deadline = deadlineAfter(clock_.monotonic(), delay);
   bool wakeServer = false;
   {
-    const platform::MutexLock lock(mutex_);
-    delayed_.add(deadline, std::move(work));
+    const MutexLock lock(mutex_);
+    delayed_.add(deadline, {std::move(work), {}});
     wakeServer = deadline < sleepsUntil_ && mustWake();
   }
   if (wakeServer) {
@@ -54,14 +54,14 @@ bool ServerQueue::isCurrent() const noexcept {
 }
 
 std::size_t ServerQueue::waiting() const noexcept {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   return ready() + (delayed_.empty() ? 0 : delayed_.dueCount(clock_.monotonic()));
 }
 
 void ServerQueue::wake() {
   bool wakeServer = false;
   {
-    const platform::MutexLock lock(mutex_);
+    const MutexLock lock(mutex_);
     woken_ = true;
     wakeServer = mustWake();
   }
@@ -74,10 +74,11 @@ std::size_t ServerQueue::run(std::size_t limit) {
   const CurrentQueue current(this);
   std::size_t count = 0;
   while (count < limit && (next_ < batch_.size() || refill())) {
-    platform::Work work = std::move(batch_[next_++]);
+    Piece piece = std::move(batch_[next_++]);
     ready_.fetch_sub(1, std::memory_order_relaxed);
     progress_.step();
-    work();
+    const LogClientScope scope(piece.client);
+    piece.work();
     ++count;
   }
   return count;
@@ -87,9 +88,9 @@ bool ServerQueue::refill() {
   batch_.clear();
   next_ = 0;
   if (batch_.capacity() > kKeptPieces) {
-    batch_ = std::vector<platform::Work>();
+    batch_ = std::vector<Piece>();
   }
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   if (!delayed_.empty()) {
     const auto now = clock_.monotonic();
     while (delayed_.due(now)) {
@@ -104,7 +105,7 @@ bool ServerQueue::refill() {
 std::optional<std::chrono::nanoseconds> ServerQueue::prepareToSleep() {
   using std::chrono::nanoseconds;
   if (ready() != 0) return nanoseconds::zero();
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   if (ready() != 0 || std::exchange(woken_, false)) return nanoseconds::zero();
   std::optional<nanoseconds> timeout;
   sleepsUntil_ = nanoseconds::max();
@@ -119,7 +120,7 @@ std::optional<std::chrono::nanoseconds> ServerQueue::prepareToSleep() {
 }
 
 bool ServerQueue::prepareToWait() {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   if (std::exchange(woken_, false)) return false;
   sleepsUntil_ = {};  // what is delayed stays so
   sleeping_ = true;
@@ -127,7 +128,7 @@ bool ServerQueue::prepareToWait() {
 }
 
 void ServerQueue::awake() {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   sleeping_ = false;
 }
 

@@ -18,12 +18,13 @@
 #include <optional>
 #include <vector>
 
+#include "host/log/LogClient.h"
 #include "host/loop/DelayedWork.h"
 #include "host/loop/QueueProgress.h"
 #include "host/system/UniqueDescriptor.h"
 #include "platform/Clock.h"
-#include "platform/ThreadSafety.h"
 #include "platform/WorkQueue.h"
+#include "plist/ThreadSafety.h"
 
 namespace tarn::linux_host {
 
@@ -59,6 +60,11 @@ class ServerQueue final : public platform::WorkQueue {
   void drainWake() noexcept;
 
  private:
+  struct Piece {
+    platform::Work work;
+    LogClient client;  // on whose behalf it was handed over
+  };
+
   bool refill();
   // Whether the caller must write the wake descriptor after letting go of the lock.
   bool mustWake() noexcept TARN_REQUIRES(mutex_);
@@ -71,12 +77,12 @@ class ServerQueue final : public platform::WorkQueue {
   std::atomic<std::size_t> ready_{0};
 
   // Serving thread only.
-  std::vector<platform::Work> batch_;
+  std::vector<Piece> batch_;
   std::size_t next_ = 0;
 
-  mutable platform::Mutex mutex_;
-  std::vector<platform::Work> incoming_ TARN_GUARDED_BY(mutex_);
-  DelayedWork<platform::Work> delayed_ TARN_GUARDED_BY(mutex_);
+  mutable Mutex mutex_;
+  std::vector<Piece> incoming_ TARN_GUARDED_BY(mutex_);
+  DelayedWork<Piece> delayed_ TARN_GUARDED_BY(mutex_);
   bool sleeping_ TARN_GUARDED_BY(mutex_) = false;
   bool woken_ TARN_GUARDED_BY(mutex_) = false;  // wake() was called and no turn has begun since
   std::chrono::nanoseconds sleepsUntil_ TARN_GUARDED_BY(mutex_){};

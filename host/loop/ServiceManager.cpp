@@ -2,14 +2,17 @@
 
 #include <systemd/sd-daemon.h>
 
+#include <string>
+
 namespace tarn::linux_host {
 
 void ServiceManager::notifyReady() {
   sd_notify(0, "READY=1");
 }
 
-void ServiceManager::notifyStopping() {
-  sd_notify(0, "STOPPING=1");
+void ServiceManager::notifyStopping(std::chrono::microseconds longest) {
+  const std::string told = "STOPPING=1\nEXTEND_TIMEOUT_USEC=" + std::to_string(longest.count());
+  sd_notify(0, told.c_str());
 }
 
 void ServiceManager::notifyWatchdog() {

@@ -12,8 +12,8 @@ class ServiceManager {
   virtual ~ServiceManager() = default;
   // The listener accepts.
   virtual void notifyReady();
-  // The service is about to end.
-  virtual void notifyStopping();
+  // The service is about to end: from now on it takes at most so long.
+  virtual void notifyStopping(std::chrono::microseconds longest);
   virtual void notifyWatchdog();
   // How long the manager lets the service be silent; nothing when it doesn't watch this process.
   virtual std::optional<std::chrono::microseconds> watchdogInterval() const;

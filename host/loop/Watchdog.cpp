@@ -8,6 +8,10 @@ bool queueIsAlive(const QueueProgress::Sample& before, const QueueProgress::Samp
   return now.waitingSince && monotonicNow - *now.waitingSince < kLongestDeliberateWait;
 }
 
+bool othersHaveTurns(std::chrono::nanoseconds lastTurn, std::chrono::nanoseconds monotonicNow) noexcept {
+  return monotonicNow - lastTurn <= kLongestTurn;
+}
+
 Watchdog::Watchdog(const platform::Clock& clock, const QueueProgress& progress, ServiceManager& manager)
     : clock_(clock), progress_(progress), manager_(manager) {}
 
@@ -19,7 +23,7 @@ void Watchdog::start() {
 
 void Watchdog::stop() {
   {
-    const platform::MutexLock lock(mutex_);
+    const MutexLock lock(mutex_);
     stopping_ = true;
   }
   changed_.notifyAll();
@@ -30,7 +34,11 @@ void Watchdog::stop() {
 
 bool Watchdog::check() {
   const auto now = progress_.sample();
-  const bool alive = queueIsAlive(before_, now, clock_.monotonic());
+  const auto monotonicNow = clock_.monotonic();
+  if (!lastTurn_ || now.turns != before_.turns || now.idle || now.waitingSince) {
+    lastTurn_ = monotonicNow;
+  }
+  const bool alive = queueIsAlive(before_, now, monotonicNow) && othersHaveTurns(*lastTurn_, monotonicNow);
   before_ = now;
   if (alive) {
     manager_.notifyWatchdog();

@@ -1,5 +1,5 @@
-// Watchdog: tells the service manager, when it asks for that, that the server queue is alive. A queue that hangs gets
-// no ping, and the manager restarts the service.
+// Watchdog: tells the service manager, when it asks for that, that the server queue is alive. A queue that hangs, or
+// that works on and on and lets nobody else have a turn, gets no ping, and the manager restarts the service.
 //
 // Owned by the platform. start() makes a thread of its own, so that a busy queue can be told from a hung one.
 #pragma once
@@ -10,17 +10,23 @@
 #include "host/loop/QueueProgress.h"
 #include "host/loop/ServiceManager.h"
 #include "platform/Clock.h"
-#include "platform/ThreadSafety.h"
+#include "plist/ThreadSafety.h"
 
 namespace tarn::linux_host {
 
 // The longest that work may block the queue on purpose, and what its end may take to be seen.
 inline constexpr std::chrono::nanoseconds kLongestDeliberateWait = std::chrono::seconds(180 + 5);
 
+// The longest that work may go on without a turn of the main loop, in which all others are looked at.
+inline constexpr std::chrono::nanoseconds kLongestTurn = std::chrono::seconds(60);
+
 // Whether the queue is alive: it did something since the sample before, has nothing to do, or waits on purpose and not
 // yet too long.
 bool queueIsAlive(const QueueProgress::Sample& before, const QueueProgress::Sample& now,
                   std::chrono::nanoseconds monotonicNow) noexcept;
+// Whether the queue lets others have their turn: there was one, nothing to do, or a deliberate wait (which serves the
+// sockets) not longer ago than the longest turn.
+bool othersHaveTurns(std::chrono::nanoseconds lastTurn, std::chrono::nanoseconds monotonicNow) noexcept;
 
 class Watchdog {
  public:
@@ -42,9 +48,10 @@ class Watchdog {
   const platform::Clock& clock_;
   const QueueProgress& progress_;
   ServiceManager& manager_;
-  QueueProgress::Sample before_;  // of the last look
-  platform::Mutex mutex_;
-  platform::ConditionVariable changed_;
+  QueueProgress::Sample before_;                      // of the last look
+  std::optional<std::chrono::nanoseconds> lastTurn_;  // by what the looks saw
+  Mutex mutex_;
+  ConditionVariable changed_;
   bool stopping_ TARN_GUARDED_BY(mutex_) = false;
   std::thread thread_;
 };

@@ -37,7 +37,7 @@ void runOne(WorkerPool::Line& line, platform::Work work) {
 }  // namespace
 
 void WorkerPool::start(std::size_t threads) {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   if (!threads_.empty() || stopping_) return;
   try {
     for (std::size_t i = 0; i < threads; ++i) {
@@ -51,7 +51,7 @@ void WorkerPool::start(std::size_t threads) {
 void WorkerPool::stop() {
   std::vector<std::thread> threads;
   {
-    const platform::MutexLock lock(mutex_);
+    const MutexLock lock(mutex_);
     stopping_ = true;
     threads.swap(threads_);
   }
@@ -68,7 +68,7 @@ void WorkerPool::destroyWhatIsLeft() {
   // Destroyed behind the lock: its end may come back here.
   std::vector<platform::Work> left;
   DelayedWork<Delayed> delayed;
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   over_ = true;
   std::swap(delayed, delayed_);
   for (auto& [moment, line] : suspensions_) {
@@ -84,7 +84,7 @@ void WorkerPool::destroyWhatIsLeft() {
 }
 
 void WorkerPool::add(const std::shared_ptr<Line>& line, platform::Work work, Urgency urgency) {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   if (over_) return;
   enqueue(line, std::move(work));
   if (urgency == Urgency::AtOnce && looking_) {
@@ -93,7 +93,7 @@ void WorkerPool::add(const std::shared_ptr<Line>& line, platform::Work work, Urg
 }
 
 void WorkerPool::addAfter(const std::shared_ptr<Line>& line, nanoseconds delay, platform::Work work) {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   if (over_) return;
   if (delay <= nanoseconds::zero()) {
     enqueue(line, std::move(work));
@@ -105,7 +105,7 @@ void WorkerPool::addAfter(const std::shared_ptr<Line>& line, nanoseconds delay, 
 
 void WorkerPool::suspend(const std::shared_ptr<Line>& line, nanoseconds longest, platform::Work next) {
   line->interrupted = true;
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   const auto moment = deadlineAfter(clock_.monotonic(), std::max(longest, nanoseconds::zero()));
   line->next = std::move(next);
   line->suspension = suspensions_.emplace(std::pair(moment, nextSuspension_++), line).first;
@@ -114,7 +114,7 @@ void WorkerPool::suspend(const std::shared_ptr<Line>& line, nanoseconds longest,
 }
 
 void WorkerPool::resume(const std::shared_ptr<Line>& line) {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   if (line->suspension) {
     endSuspension(*line->suspension);
   }
@@ -122,7 +122,7 @@ void WorkerPool::resume(const std::shared_ptr<Line>& line) {
 
 void WorkerPool::help(const std::shared_ptr<Line>& line, nanoseconds longest) {
   if (CurrentQueue::is(line.get())) return;
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   ++helpers_;
   turnEnded_.waitFor(mutex_, longest, [&line] { return !line->running; });
   --helpers_;
@@ -134,12 +134,12 @@ void WorkerPool::help(const std::shared_ptr<Line>& line, nanoseconds longest) {
 }
 
 std::size_t WorkerPool::unfinished() const {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   return unfinished_;
 }
 
 bool WorkerPool::settle(nanoseconds longest) {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   return settled_.waitFor(mutex_, std::min(longest, kLongestSleep),
                           [this]() TARN_REQUIRES(mutex_) { return unfinished_ == 0; });
 }
@@ -215,7 +215,7 @@ void WorkerPool::watchNextMoment() {
 }
 
 void WorkerPool::serve() {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   bool worked = false;
   for (;;) {
     takeDue();

@@ -28,8 +28,8 @@
 
 #include "host/loop/DelayedWork.h"
 #include "platform/Clock.h"
-#include "platform/ThreadSafety.h"
 #include "platform/WorkQueue.h"
+#include "plist/ThreadSafety.h"
 
 namespace tarn::linux_host {
 
@@ -102,11 +102,11 @@ class WorkerPool {
   const Marks marks_;
   RoomHandler roomHandler_;
   std::atomic<bool> full_{false};
-  mutable platform::Mutex mutex_;        // guards of the lines, too, what they say
-  platform::ConditionVariable changed_;  // for the sleepers
-  platform::ConditionVariable ended_;    // for the one that is about to look
-  platform::ConditionVariable settled_;
-  platform::ConditionVariable turnEnded_;  // for those who help
+  mutable Mutex mutex_;        // guards of the lines, too, what they say
+  ConditionVariable changed_;  // for the sleepers
+  ConditionVariable ended_;    // for the one that is about to look
+  ConditionVariable settled_;
+  ConditionVariable turnEnded_;  // for those who help
   std::size_t helpers_ TARN_GUARDED_BY(mutex_) = 0;
   std::deque<std::shared_ptr<Line>> runnable_ TARN_GUARDED_BY(mutex_);
   DelayedWork<Delayed> delayed_ TARN_GUARDED_BY(mutex_);

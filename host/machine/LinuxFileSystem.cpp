@@ -59,7 +59,7 @@ Status copyContent(int from, FileReplacement& to) {
 
 // For another file system, where a file can't just be renamed: a copy beside the target takes its place when whole.
 Status moveByCopy(const std::string& from, const std::string& to) {
-  const UniqueDescriptor source(::open(from.c_str(), O_RDONLY | O_CLOEXEC));
+  const UniqueDescriptor source(::open(from.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW));
   if (!source) return lastSystemError();
   std::string beside = to + ".XXXXXX";
   UniqueDescriptor made(::mkostemp(beside.data(), O_CLOEXEC));
@@ -94,7 +94,7 @@ Status LinuxFileSystem::createFile(std::string_view path) {
 }
 
 Result<std::unique_ptr<platform::WritableFile>> LinuxFileSystem::openForWriting(std::string_view path) {
-  const int file = ::open(std::string(path).c_str(), O_WRONLY | O_TRUNC | O_CLOEXEC);
+  const int file = ::open(std::string(path).c_str(), O_WRONLY | O_TRUNC | O_CLOEXEC | O_NOFOLLOW);
   if (file < 0) return {nullptr, lastSystemError()};
   return {std::make_unique<OpenFile>(file), {}};
 }

@@ -10,7 +10,7 @@
 #include <cstring>
 #include <utility>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 #include "host/settings/PlainName.h"
 #include "host/system/SystemError.h"
 #include "platform/WorkQueue.h"
@@ -58,7 +58,7 @@ void FileNotificationCenter::cancel(std::int32_t token) {
 bool FileNotificationCenter::post(std::string_view name, std::optional<std::uint64_t> state) {
   const Status posted = folder_.post(name, state);
   if (posted.failed()) {
-    hostLog(log_, kHostCategory, platform::LogLevel::Error, kModule, "notification not posted: " + posted->text);
+    logPrefixed(log_, kHostCategory, platform::LogLevel::Error, kModule, "notification not posted: " + posted->text);
   }
   return posted.ok();
 }
@@ -101,7 +101,8 @@ void FileNotificationCenter::handleEvent(int watch, std::uint32_t mask, std::str
   } else if ((mask & kFolderGone) != 0) {
     if (watch == watch_) {  // the last words of an earlier watch come late
       ::inotify_rm_watch(events_.get(), std::exchange(watch_, -1));
-      hostLog(log_, kHostCategory, platform::LogLevel::Error, kModule, folder_.path() + " went away; it is made anew");
+      logPrefixed(log_, kHostCategory, platform::LogLevel::Error, kModule,
+                  folder_.path() + " went away; it is made anew");
       renewWatch();
     }
   } else if ((mask & kPosts) != 0) {

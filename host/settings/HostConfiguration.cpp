@@ -109,7 +109,7 @@ struct Setting {
 
 using Node = const toml::node&;
 using Host = HostConfiguration&;
-constexpr std::array<Setting, 13> kSettings{{
+constexpr std::array<Setting, 14> kSettings{{
     {"tally", "in_use", [](Node node, Host host) { return take(node, host.tally.inUse); }},
     {"rtc", "backends", [](Node node, Host host) { return take(node, host.rtc.backends); }},
     {"rtc", "no_backends", [](Node node, Host host) { return take(node, host.rtc.noBackends); }},
@@ -121,6 +121,7 @@ constexpr std::array<Setting, 13> kSettings{{
     {"paths", "alsa", [](Node node, Host host) { return take(node, host.paths.alsa); }},
     {"paths", "trace_analysis",
      [](Node node, Host host) { return takePath(node, "a file", host.paths.traceAnalysis); }},
+    {"recorder", "enabled", [](Node node, Host host) { return take(node, host.recorderEnabled); }},
     {"recorder", "max_megabytes",
      [](Node node, Host host) { return takeWithin<1, 1048576>(node, host.recorder.maxMegabytes); }},
     {"recorder", "max_age_days",

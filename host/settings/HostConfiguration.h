@@ -37,6 +37,7 @@ struct HostConfiguration {
   tarn::recorder::RecorderRtcReportingService::Behaviour rtc;
   Snare snare;
   Paths paths;
+  bool recorderEnabled = true;  // false: nothing stands in for the back-ends, and nothing is recorded
   tarn::recorder::RecorderOptions recorder;
   HostLimits limits;
 

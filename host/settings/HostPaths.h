@@ -3,15 +3,18 @@
 
 #include <optional>
 #include <string>
+#include <vector>
 
 namespace tarn::linux_host {
 
 // What the defaults depend on; unset and relative variables don't count.
 struct HostEnvironment {
   bool isRoot = false;
-  std::string runtimeDirectory;  // XDG_RUNTIME_DIR
-  std::string stateHome;         // XDG_STATE_HOME
-  std::string home;              // HOME
+  std::string runtimeDirectory;    // XDG_RUNTIME_DIR
+  std::string stateHome;           // XDG_STATE_HOME
+  std::string home;                // HOME
+  std::string program = {};        // the path of this program
+  std::string serviceSocket = {};  // TARNREPORTING_SOCKET: where clients look for the service
 
   // That of this process.
   static HostEnvironment current();
@@ -19,6 +22,13 @@ struct HostEnvironment {
 
 // $XDG_RUNTIME_DIR/tarnreporting.sock, for root /run/tarnreporting/socket; nothing when there is no such variable.
 std::optional<std::string> defaultSocketPath(const HostEnvironment& environment);
+// Where a client looks for the service, in this order: the place that the environment names, else the user's and the
+// system's.
+std::vector<std::string> serviceSocketPaths(const HostEnvironment& environment);
+// The configuration of the installation that the program is part of: of PREFIX/bin that is
+// PREFIX/etc/tarnreporting/tarnreportingd.toml, but /etc/... for the prefix /usr and /etc/PREFIX/... for one in /opt.
+// Empty when the program's place isn't known.
+std::string defaultConfigurationFile(const HostEnvironment& environment);
 // $XDG_STATE_HOME/tarnreporting, without it ~/.local/state/tarnreporting, for root /var/lib/tarnreporting; nothing when
 // there is no home either.
 std::optional<std::string> defaultStateDirectory(const HostEnvironment& environment);

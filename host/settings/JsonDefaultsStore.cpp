@@ -8,7 +8,7 @@
 #include <optional>
 #include <utility>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 #include "host/settings/PlainName.h"
 #include "host/system/FileLock.h"
 #include "host/system/FileReplacement.h"
@@ -58,7 +58,7 @@ plist::Value JsonDefaultsStore::preference(std::string_view key, std::string_vie
 bool JsonDefaultsStore::setValue(std::string_view suiteName, std::string_view key, const plist::ValueView& value) {
   const Status stored = store(suiteName, key, value);
   if (stored.failed()) {
-    hostLog(log_, kHostCategory, platform::LogLevel::Error, kModule, "defaults not written: " + stored->text);
+    logPrefixed(log_, kHostCategory, platform::LogLevel::Error, kModule, "defaults not written: " + stored->text);
   }
   return stored.ok();
 }
@@ -68,7 +68,7 @@ JsonDefaultsStore::Suite JsonDefaultsStore::suite(std::string_view name) const {
   const std::string path = pathOf(name);
   struct stat facts {};
   const Stamp now = stampOf(::stat(path.c_str(), &facts), facts);
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   auto at = cache_.find(name);
   if (at == cache_.end()) {
     if (cache_.size() == kMaximumCachedSuites) {
@@ -128,7 +128,7 @@ bool JsonDefaultsStore::isSettled(const Stamp& stamp) {
 
 // Reads the file and tells which state of it that was.
 JsonDefaultsStore::Suite JsonDefaultsStore::read(const std::string& path, Stamp& stamp) {
-  const UniqueDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
+  const UniqueDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY | O_NOFOLLOW));
   struct stat facts {};
   if (!file) {
     const int error = errno;
@@ -148,8 +148,8 @@ void JsonDefaultsStore::logFault(Cached& cached) const {
   cached.logged = read;
   if (read.ok()) return;
   cached.loggedStamp = cached.stamp;
-  hostLog(log_, kHostCategory, platform::LogLevel::Error, kModule,
-          "defaults file is broken and reads as empty: " + read->text);
+  logPrefixed(log_, kHostCategory, platform::LogLevel::Error, kModule,
+              "defaults file is broken and reads as empty: " + read->text);
 }
 
 }  // namespace tarn::linux_host

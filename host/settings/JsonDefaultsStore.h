@@ -24,9 +24,9 @@
 
 #include "platform/DefaultsStore.h"
 #include "platform/Log.h"
-#include "platform/ThreadSafety.h"
 #include "plist/Dictionary.h"
 #include "plist/Result.h"
+#include "plist/ThreadSafety.h"
 
 namespace tarn::linux_host {
 
@@ -83,7 +83,7 @@ class JsonDefaultsStore final : public platform::DefaultsStore {
   const std::string folder_;
   platform::Log& log_;
   const std::chrono::milliseconds lockPatience_;
-  mutable platform::Mutex mutex_;
+  mutable Mutex mutex_;
   mutable std::map<std::string, Cached, std::less<>> cache_ TARN_GUARDED_BY(mutex_);
 };
 

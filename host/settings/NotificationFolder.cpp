@@ -59,7 +59,7 @@ Status NotificationFolder::make() const {
 
 std::optional<std::uint64_t> NotificationFolder::state(std::string_view name) const {
   const std::string path = path_ + "/" + std::string(name);
-  const UniqueDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
+  const UniqueDescriptor file(::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY | O_NOFOLLOW));
   return file ? readWord(file.get()) : std::nullopt;
 }
 

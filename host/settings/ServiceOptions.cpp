@@ -16,7 +16,7 @@ constexpr const char* kPurpose = "Gathers audio analytics: serves reporting sess
 constexpr const char* kFooter =
     "The listener is the socket that the service manager hands over (LISTEN_FDS), else --socket. SIGTERM and SIGINT "
     "end\n"
-    "the service once everything that it recorded is on disk.\n"
+    "each client and its sessions, then the service, once everything that it recorded is on disk.\n"
     "\n"
     "Exit status: 0 after SIGTERM, SIGINT, --help and --version; 1 when it can't serve (the state directory, the "
     "socket\n"
@@ -53,7 +53,8 @@ void addOptions(CLI::App& app, RawOptions& raw) {
                  "/var/lib/tarnreporting)")
       ->type_name("DIR")
       ->check(checkNotEmpty);
-  app.add_option("--config", raw.configurationFile, "Configuration file, TOML (default: none)")
+  app.add_option("--config", raw.configurationFile,
+                 "Configuration file, TOML (default: the installed tarnreporting/tarnreportingd.toml, if there is one)")
       ->type_name("FILE")
       ->check(checkNotEmpty);
   app.add_option("--device-properties", raw.devicePropertiesFile,
@@ -107,6 +108,7 @@ ServiceCommand parseServiceCommand(int argumentCount, const char* const* argumen
   options.socketIsDefault = raw.socketPath.empty();
   options.stateDirectory = *stateDirectory;
   options.configurationFile = orNothing(raw.configurationFile);
+  options.defaultConfigurationFile = defaultConfigurationFile(environment);
   options.devicePropertiesFile = orNothing(raw.devicePropertiesFile);
   options.logLevel = *logLevelFromName(raw.logLevel);
   options.logTarget = raw.logTarget;

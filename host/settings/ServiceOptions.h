@@ -22,6 +22,7 @@ struct ServiceOptions {
   bool socketIsDefault = false;           // then its folder is the service's own to make
   std::string stateDirectory;
   std::optional<std::string> configurationFile;
+  std::string defaultConfigurationFile;  // read when none is named and it is there
   std::optional<std::string> devicePropertiesFile;
   platform::LogLevel logLevel = platform::LogLevel::Default;
   std::string logTarget = "stderr";

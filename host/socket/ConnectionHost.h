@@ -4,6 +4,8 @@
 // resumeRequests().
 #pragma once
 
+#include <unordered_set>
+
 #include "host/loop/MainLoop.h"
 #include "host/socket/ConnectionGate.h"
 #include "host/socket/HostLimits.h"
@@ -13,6 +15,14 @@
 #include "wire/RequestDecoder.h"
 
 namespace tarn::linux_host {
+
+// A connection that is open.
+class OpenConnection {
+ public:
+  virtual ~OpenConnection() = default;
+  // From now on nothing more comes in: the connection ends as if its client had closed it now.
+  virtual void endInput() = 0;
+};
 
 class ConnectionHost {
  public:
@@ -30,6 +40,16 @@ class ConnectionHost {
   void setStatusSource(StatusSource source) { status_ = std::move(source); }
   plist::Dictionary status() { return status_ ? status_() : ledger.status(0, loop.queue()->waiting(), {}); }
 
+  // Connections note themselves while they are open.
+  void add(OpenConnection& connection) { open_.insert(&connection); }
+  void remove(OpenConnection& connection) { open_.erase(&connection); }
+  // Ends all connections in order.
+  void endInputs() {
+    for (OpenConnection* connection : open_) {
+      connection->endInput();
+    }
+  }
+
   // Tells that the pause source's answer changed. Threads: any.
   void resumeRequests() { loop.queue()->wake(); }
 
@@ -45,6 +65,7 @@ class ConnectionHost {
 
  private:
   StatusSource status_;
+  std::unordered_set<OpenConnection*> open_;
 };
 
 }  // namespace tarn::linux_host

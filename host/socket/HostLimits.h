@@ -26,6 +26,8 @@ struct HostLimits {
   WorkerPool::Marks poolWork;
   // For how long the end waits for those queues without seeing them get shorter; then what is left stays undone.
   std::chrono::milliseconds settleTime{500};
+  // For how long the end in order serves the clients' ends; then what is left of them is dropped.
+  std::chrono::milliseconds endTime{10'000};
 
   bool operator==(const HostLimits&) const = default;
 };

@@ -39,7 +39,8 @@ plist::Dictionary Ledger::status(std::uint64_t sessions, std::uint64_t queued, c
           {"recorder_committed", recorder.committed},
           {"recorder_waiting", recorder.waiting},
           {"recorder_expired", recorder.expired},
-          {"recorder_failed", recorder.failed}};
+          {"recorder_failed", recorder.failed},
+          {"recorder_lost_before", recorder.lostBefore}};
 }
 
 }  // namespace tarn::linux_host

@@ -29,6 +29,7 @@ struct RecorderCounts {
   std::uint64_t waiting = 0;
   std::uint64_t expired = 0;
   std::uint64_t failed = 0;
+  std::uint64_t lostBefore = 0;  // of the run before: handed over, and not committed when it was killed
 };
 
 struct Ledger {

@@ -6,7 +6,8 @@
 #include <algorithm>
 #include <cerrno>
 
-#include "host/log/HostLog.h"
+#include "host/log/LogFloodGuard.h"
+#include "host/log/PrefixedLog.h"
 #include "wire/Encoder.h"
 
 namespace tarn::linux_host {
@@ -22,19 +23,17 @@ constexpr std::size_t kKeptOutputBytes = 65536;
 }  // namespace
 
 SocketConnection::SocketConnection(ConnectionHost& host, UniqueDescriptor socket, std::uint64_t number)
-    : host_(host), socket_(std::move(socket)), number_(number), frames_(host.limits.maxFrameBytes) {
+    : host_(host), socket_(std::move(socket)), client_{.connection = number}, frames_(host.limits.maxFrameBytes) {
   ucred peer{};
   socklen_t size = sizeof peer;
   if (::getsockopt(socket_.get(), SOL_SOCKET, SO_PEERCRED, &peer, &size) == 0) {
-    processIdentifier_ = peer.pid;
+    client_.process = peer.pid;
+    client_.user = peer.uid;
   }
+  description_ = describe(client_);
 }
 
 SocketConnection::~SocketConnection() = default;
-
-std::string SocketConnection::description() const {
-  return "connection " + std::to_string(number_) + " of process " + std::to_string(processIdentifier_);
-}
 
 void SocketConnection::setExportedObject(std::shared_ptr<platform::TarnReportingServiceProtocol> object) {
   object_ = std::move(object);
@@ -45,6 +44,7 @@ void SocketConnection::resume() {
   state_ = State::Open;
   ++host_.ledger.connectionsOpen;
   ++host_.ledger.connectionsTotal;
+  host_.add(*this);
   watch(EPOLLIN);
 }
 
@@ -63,6 +63,7 @@ void SocketConnection::watch(std::uint32_t events) {
 }
 
 void SocketConnection::handleEvents(std::uint32_t events) {
+  const LogClientScope scope(client_);
   if ((events & EPOLLOUT) != 0) {
     flush();
   }
@@ -146,6 +147,7 @@ void SocketConnection::serveRequest(wire::DecodedRequest& request) {
 }
 
 void SocketConnection::serveHeldRequest() {
+  const LogClientScope scope(client_);
   if (state_ != State::Open || !heldRequest_) return;
   wire::DecodedRequest request = std::move(*heldRequest_);
   heldRequest_.reset();
@@ -153,6 +155,13 @@ void SocketConnection::serveHeldRequest() {
   serveFrames();
   if (state_ == State::Open && !heldRequest_) {
     watch(watchedEvents_ | EPOLLIN);
+  }
+}
+
+// The socket then yields what came before and its end, in this order.
+void SocketConnection::endInput() {
+  if (socket_) {
+    ::shutdown(socket_.get(), SHUT_RD);
   }
 }
 
@@ -195,6 +204,7 @@ void SocketConnection::replyAppended() {
 }
 
 void SocketConnection::flush() {
+  const LogClientScope scope(client_);
   flushAsked_ = false;
   if (!socket_ || !sendSome()) return;
   if (unsentBytes() == 0) {
@@ -263,7 +273,8 @@ void SocketConnection::peerEnded(bool reset) {
 
 void SocketConnection::cut(CutReason reason, const std::string& why) {
   host_.ledger.countCut(reason);
-  hostLog(host_.log, kConnectionCategory, platform::LogLevel::Error, kModule, "cut off " + description() + ": " + why);
+  logPrefixed(host_.log, kConnectionCategory, platform::LogLevel::Error, kModule,
+              "cut off " + description() + ": " + why);
   beginEnd(true);
 }
 
@@ -285,6 +296,7 @@ void SocketConnection::finish(bool interrupted) {
   state_ = State::Ended;
   socket_.reset();
   --host_.ledger.connectionsOpen;
+  host_.remove(*this);
   if (auto handler = std::exchange(interruptionHandler_, {}); handler && interrupted) {
     handler();
   }

@@ -15,6 +15,7 @@
 #include <optional>
 #include <string>
 
+#include "host/log/LogClient.h"
 #include "host/socket/ConnectionHost.h"
 #include "host/socket/RequestDispatcher.h"
 #include "host/system/UniqueDescriptor.h"
@@ -26,17 +27,21 @@ namespace tarn::linux_host {
 class SocketConnection final : public platform::Connection,
                                public EventHandler,
                                public HeldConnection,
+                               public OpenConnection,
                                public ReplySink,
                                public std::enable_shared_from_this<SocketConnection> {
  public:
-  // Takes over a connected socket that doesn't block. `number` names it in logs. The host outlives the connection.
+  // Takes over a connected socket that doesn't block. `number` names it in logs, from 1. The host outlives the
+  // connection.
   SocketConnection(ConnectionHost& host, UniqueDescriptor socket, std::uint64_t number);
   SocketConnection(const SocketConnection&) = delete;
   SocketConnection& operator=(const SocketConnection&) = delete;
   ~SocketConnection() override;
 
-  std::int32_t processIdentifier() const override { return processIdentifier_; }
-  std::string description() const override;
+  std::int32_t processIdentifier() const override { return client_.process; }
+  const LogClient& client() const noexcept { return client_; }
+  // With number, process, user and executable of the client, as they were when it connected.
+  std::string description() const override { return description_; }
   void setExportedObject(std::shared_ptr<platform::TarnReportingServiceProtocol> object) override;
   void setInterruptionHandler(Handler handler) override { interruptionHandler_ = std::move(handler); }
   void setInvalidationHandler(Handler handler) override { invalidationHandler_ = std::move(handler); }
@@ -45,6 +50,7 @@ class SocketConnection final : public platform::Connection,
   void handleEvents(std::uint32_t events) override;
   void flush() override;
   void serveHeldRequest() override;
+  void endInput() override;
 
   void sendReply(std::uint64_t id, std::initializer_list<plist::ValueView> results) override;
   void sendNumbers(std::uint64_t id, std::span<const std::int64_t> numbers) override;
@@ -80,8 +86,8 @@ class SocketConnection final : public platform::Connection,
 
   ConnectionHost& host_;
   UniqueDescriptor socket_;
-  const std::uint64_t number_;
-  std::int32_t processIdentifier_ = 0;
+  LogClient client_;
+  std::string description_;
   State state_ = State::Fresh;
 
   std::shared_ptr<platform::TarnReportingServiceProtocol> object_;

@@ -5,7 +5,7 @@
 
 #include <cerrno>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 #include "host/socket/SocketConnection.h"
 
 namespace tarn::linux_host {
@@ -25,7 +25,7 @@ SocketListener::SocketListener(ConnectionHost& host, ListenSocket socket) : host
 SocketListener::~SocketListener() = default;
 
 void SocketListener::resume() {
-  hostLog(host_.log, kHostCategory, platform::LogLevel::Default, kModule, "listening on " + socket_.name());
+  logPrefixed(host_.log, kHostCategory, platform::LogLevel::Default, kModule, "listening on " + socket_.name());
   startAccepting();
 }
 
@@ -68,7 +68,8 @@ void SocketListener::pauseAccepting(const std::string& why) {
   }
   ++host_.ledger.acceptPauses;
   if (!std::exchange(shortage_, true)) {
-    hostLog(host_.log, kHostCategory, platform::LogLevel::Error, kModule, why + "; clients wait until there is room");
+    logPrefixed(host_.log, kHostCategory, platform::LogLevel::Error, kModule,
+                why + "; clients wait until there is room");
   }
   host_.loop.queue()->asyncAfter(kAcceptPause, [weak = weak_from_this()] {
     if (const auto self = weak.lock()) {
@@ -79,12 +80,15 @@ void SocketListener::pauseAccepting(const std::string& why) {
 
 void SocketListener::take(UniqueDescriptor client) {
   if (std::exchange(shortage_, false)) {
-    hostLog(host_.log, kHostCategory, platform::LogLevel::Default, kModule, "accepting clients again");
+    logPrefixed(host_.log, kHostCategory, platform::LogLevel::Default, kModule, "accepting clients again");
   }
+  const auto connection = std::make_shared<SocketConnection>(host_, std::move(client), nextNumber_++);
+  const LogClientScope scope(connection->client());
   const auto delegate = delegate_.lock();
-  if (delegate == nullptr) return;
-  delegate->listenerShouldAcceptNewConnection(
-      std::make_shared<SocketConnection>(host_, std::move(client), nextNumber_++));
+  if (delegate == nullptr || !delegate->listenerShouldAcceptNewConnection(connection)) {
+    logPrefixed(host_.log, kConnectionCategory, platform::LogLevel::Error, kModule,
+                "refused " + connection->description() + ": the service takes no client now");
+  }
 }
 
 }  // namespace tarn::linux_host

@@ -2,7 +2,7 @@
 
 #include <utility>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 #include "host/traces/TraceThread.h"
 #include "plist/Result.h"
 
@@ -71,7 +71,7 @@ std::shared_ptr<platform::PerformanceTraceSession> LinuxPerformanceTraceService:
     ready = Error{0, "performance traces have no thread to run on"};
   }
   if (ready.failed()) {
-    hostLog(parts_.log, kTraceCategory, platform::LogLevel::Error, kModule, ready->text);
+    logPrefixed(parts_.log, kTraceCategory, platform::LogLevel::Error, kModule, ready->text);
     return nullptr;
   }
   return std::make_shared<Session>(

@@ -24,19 +24,19 @@ void LinuxSignposts::mark(const platform::Signpost& signpost) noexcept {
 }
 
 void LinuxSignposts::add(std::shared_ptr<SignpostBuffer> buffer) {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   buffers_.push_back(std::move(buffer));
   setRecording(true);
 }
 
 void LinuxSignposts::remove(const SignpostBuffer* buffer) noexcept {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   std::erase_if(buffers_, [buffer](const auto& listed) { return listed.get() == buffer; });
   setRecording(!buffers_.empty());
 }
 
 void LinuxSignposts::take(const SignpostRecord& record) noexcept {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   for (const auto& buffer : buffers_) {
     buffer->take(record);
   }

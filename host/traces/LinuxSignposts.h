@@ -9,7 +9,7 @@
 #include "host/traces/SignpostBuffer.h"
 #include "platform/Clock.h"
 #include "platform/Signposts.h"
-#include "platform/ThreadSafety.h"
+#include "plist/ThreadSafety.h"
 
 namespace tarn::linux_host {
 
@@ -31,7 +31,7 @@ class LinuxSignposts final : public platform::Signposts {
   void take(const SignpostRecord& record) noexcept;
 
   const platform::Clock& clock_;
-  platform::Mutex mutex_;
+  Mutex mutex_;
   std::vector<std::shared_ptr<SignpostBuffer>> buffers_ TARN_GUARDED_BY(mutex_);
 };
 

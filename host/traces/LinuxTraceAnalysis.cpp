@@ -8,7 +8,7 @@
 #include <utility>
 #include <vector>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 #include "host/system/JsonValues.h"
 #include "host/traces/analysis/TraceAnalysisFactory.h"
 
@@ -23,7 +23,7 @@ constexpr std::string_view kBesideTheProgram = "../lib/tarnkit/traceanalysis.so"
 constexpr const char* kFirstClass = "SkeinTraceModel";
 
 void tell(platform::Log& log, const std::string& text) {
-  hostLog(log, kTraceCategory, LogLevel::Error, kModule, text);
+  logPrefixed(log, kTraceCategory, LogLevel::Error, kModule, text);
 }
 
 // A description that JSON can't hold asks for nothing that there is.

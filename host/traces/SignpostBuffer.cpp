@@ -13,7 +13,7 @@ void SignpostBuffer::take(const SignpostRecord& record) noexcept {
   if (record.at < since_) return;  // an interval whose begin the trace has not seen
   bool isHalfFull = false;
   {
-    const platform::MutexLock lock(mutex_);
+    const MutexLock lock(mutex_);
     if (records_.size() >= mostRecords_) {
       ++lost_;
       return;
@@ -29,7 +29,7 @@ void SignpostBuffer::take(const SignpostRecord& record) noexcept {
 SignpostBuffer::Content SignpostBuffer::drain(std::vector<SignpostRecord> spare) {
   spare.clear();
   spare.reserve(mostRecords_);
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   return {std::exchange(records_, std::move(spare)), std::exchange(lost_, 0)};
 }
 

@@ -11,7 +11,7 @@
 #include <vector>
 
 #include "platform/Signposts.h"
-#include "platform/ThreadSafety.h"
+#include "plist/ThreadSafety.h"
 
 namespace tarn::linux_host {
 
@@ -43,7 +43,7 @@ class SignpostBuffer {
   const std::size_t mostRecords_;
   const std::chrono::nanoseconds since_;
   const std::function<void()> halfFull_;
-  platform::Mutex mutex_;
+  Mutex mutex_;
   std::vector<SignpostRecord> records_ TARN_GUARDED_BY(mutex_);
   std::uint64_t lost_ TARN_GUARDED_BY(mutex_) = 0;
 };

@@ -6,7 +6,7 @@
 #include <cmath>
 #include <utility>
 
-#include "host/log/HostLog.h"
+#include "host/log/PrefixedLog.h"
 #include "plist/CalendarDate.h"
 
 namespace tarn::linux_host {
@@ -39,24 +39,24 @@ TraceRecording::TraceRecording(const TraceParts& parts, const PerformanceTraceLi
       token_("trace-" + std::to_string(number)) {}
 
 void TraceRecording::setDelegate(std::weak_ptr<platform::PerformanceTraceDelegate> delegate) {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   delegate_ = std::move(delegate);
 }
 
 bool TraceRecording::isValid() const {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   return state_ == State::Valid;
 }
 
 bool TraceRecording::askForStart() {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   if (state_ != State::New) return false;
   state_ = State::Valid;
   return true;
 }
 
 bool TraceRecording::askForStop() {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   if (state_ != State::Valid) return false;
   state_ = State::Over;
   return true;
@@ -64,7 +64,7 @@ bool TraceRecording::askForStop() {
 
 void TraceRecording::release() noexcept {
   {
-    const platform::MutexLock lock(mutex_);
+    const MutexLock lock(mutex_);
     released_ = true;
     state_ = State::Over;
   }
@@ -80,7 +80,7 @@ void TraceRecording::start(bool hasRoom, std::function<void()> wake) {
   }
   if (error.failed()) {
     file_.reset();
-    const platform::MutexLock lock(mutex_);
+    const MutexLock lock(mutex_);
     state_ = State::Over;
   } else if (!beginRecording(std::move(wake))) {
     file_.reset();
@@ -92,7 +92,7 @@ void TraceRecording::start(bool hasRoom, std::function<void()> wake) {
 void TraceRecording::drain() {
   std::shared_ptr<SignpostBuffer> buffer;
   {
-    const platform::MutexLock lock(mutex_);
+    const MutexLock lock(mutex_);
     buffer = buffer_;
   }
   if (!isOpen() || buffer == nullptr || failure_.failed()) return;
@@ -110,8 +110,8 @@ void TraceRecording::drain() {
   failure_ = file_->flush();
   if (failure_.failed()) {
     endRecording();
-    hostLog(parts_.log, kTraceCategory, LogLevel::Error, kModule,
-            "performance trace " + token_ + " can't be written and ends here: " + failure_->text);
+    logPrefixed(parts_.log, kTraceCategory, LogLevel::Error, kModule,
+                "performance trace " + token_ + " can't be written and ends here: " + failure_->text);
   }
 }
 
@@ -142,7 +142,7 @@ Status TraceRecording::openFile() {
 
 // Whether the session still wants it.
 bool TraceRecording::beginRecording(std::function<void()> wake) {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   if (released_) return false;
   buffer_ = std::make_shared<SignpostBuffer>(limits_.mostBufferedEvents, parts_.clock.monotonic(), std::move(wake));
   parts_.signposts.add(buffer_);  // locked: or a release right now would come before it
@@ -150,7 +150,7 @@ bool TraceRecording::beginRecording(std::function<void()> wake) {
 }
 
 void TraceRecording::endRecording() noexcept {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   if (buffer_ != nullptr) {
     parts_.signposts.remove(buffer_.get());
   }
@@ -166,9 +166,9 @@ void TraceRecording::sampleLoad() {
 
 void TraceRecording::logLeftOut() const {
   if (file_->leftOut() == 0) return;
-  hostLog(parts_.log, kTraceCategory, LogLevel::Error, kModule,
-          "performance trace " + token_ + " left out " + std::to_string(file_->leftOut()) +
-              " events: " + (file_->isFull() ? "its file is full" : "they came faster than they could be written"));
+  logPrefixed(parts_.log, kTraceCategory, LogLevel::Error, kModule,
+              "performance trace " + token_ + " left out " + std::to_string(file_->leftOut()) +
+                  " events: " + (file_->isFull() ? "its file is full" : "they came faster than they could be written"));
 }
 
 // Without the lock while it runs: a callback may take the delegate away or let go of the session.
@@ -176,7 +176,7 @@ template <class Call>
 void TraceRecording::tell(const Call& call) {
   std::shared_ptr<platform::PerformanceTraceDelegate> delegate;
   {
-    const platform::MutexLock lock(mutex_);
+    const MutexLock lock(mutex_);
     if (!released_) {
       delegate = delegate_.lock();
     }

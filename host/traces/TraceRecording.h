@@ -20,7 +20,7 @@
 #include "platform/Log.h"
 #include "platform/PerformanceTraceService.h"
 #include "platform/ProcessFacts.h"
-#include "platform/ThreadSafety.h"
+#include "plist/ThreadSafety.h"
 
 namespace tarn::linux_host {
 
@@ -97,7 +97,7 @@ class TraceRecording {
   Status failure_;  // of the disk
 
   std::atomic<std::uint64_t> leftOut_{0};  // set before the completion
-  mutable platform::Mutex mutex_;
+  mutable Mutex mutex_;
   std::weak_ptr<platform::PerformanceTraceDelegate> delegate_ TARN_GUARDED_BY(mutex_);
   std::shared_ptr<SignpostBuffer> buffer_ TARN_GUARDED_BY(mutex_);  // set once, when recording begins
   State state_ TARN_GUARDED_BY(mutex_) = State::New;

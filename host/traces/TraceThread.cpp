@@ -8,7 +8,7 @@
 namespace tarn::linux_host {
 
 bool TraceThread::run() {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   if (ended_) return false;
   if (thread_.joinable()) return true;
   try {
@@ -21,7 +21,7 @@ bool TraceThread::run() {
 }
 
 void TraceThread::post(Verb verb, std::shared_ptr<TraceRecording> recording) {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   if (ended_) return;
   commands_.push_back({verb, std::move(recording)});
   changed_.notifyOne();
@@ -30,7 +30,7 @@ void TraceThread::post(Verb verb, std::shared_ptr<TraceRecording> recording) {
 void TraceThread::end() {
   std::thread thread;
   {
-    const platform::MutexLock lock(mutex_);
+    const MutexLock lock(mutex_);
     ended_ = true;
     thread = std::move(thread_);
     changed_.notifyOne();
@@ -92,7 +92,7 @@ void TraceThread::carryOut(const Command& command) {
 }
 
 void TraceThread::wake() {
-  const platform::MutexLock lock(mutex_);
+  const MutexLock lock(mutex_);
   mustDrain_ = true;
   changed_.notifyOne();
 }

@@ -11,7 +11,7 @@
 #include <vector>
 
 #include "host/traces/TraceRecording.h"
-#include "platform/ThreadSafety.h"
+#include "plist/ThreadSafety.h"
 
 namespace tarn::linux_host {
 
@@ -45,8 +45,8 @@ class TraceThread {
   const PerformanceTraceLimits limits_;
   std::vector<std::shared_ptr<TraceRecording>> open_;  // the thread's own
 
-  platform::Mutex mutex_;
-  platform::ConditionVariable changed_;
+  Mutex mutex_;
+  ConditionVariable changed_;
   std::thread thread_ TARN_GUARDED_BY(mutex_);
   std::vector<Command> commands_ TARN_GUARDED_BY(mutex_);
   bool mustDrain_ TARN_GUARDED_BY(mutex_) = false;

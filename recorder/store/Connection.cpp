@@ -5,6 +5,7 @@
 #include <system_error>
 #include <utility>
 
+#include "plist/Hex.h"
 #include "recorder/store/Statement.h"
 
 namespace tarn::recorder {
@@ -48,6 +49,37 @@ std::optional<std::string> Connection::text(const char* sql) {
   return std::string(statement.text(0));
 }
 
+Result<std::int64_t> Connection::readInteger(const char* sql) {
+  Statement statement;
+  int code = statement.prepare(database_, sql);
+  if (code == SQLITE_OK) {
+    code = statement.step();
+  }
+  if (code == SQLITE_ROW) return {statement.integer(0)};
+  return {{}, code == SQLITE_DONE ? Error{SQLITE_CORRUPT, "damaged: no answer"} : errorOf(code)};
+}
+
+Result<std::string> Connection::readText(const char* sql) {
+  Statement statement;
+  int code = statement.prepare(database_, sql);
+  if (code == SQLITE_OK) {
+    code = statement.step();
+  }
+  if (code == SQLITE_ROW) return {std::string(statement.text(0))};
+  return {{}, code == SQLITE_DONE ? Error{SQLITE_CORRUPT, "damaged: no answer"} : errorOf(code)};
+}
+
+Status Connection::errorOf(int code) const {
+  if (code == SQLITE_OK || code == SQLITE_ROW || code == SQLITE_DONE) return {};
+  return Error{code, errorText()};
+}
+
+void Connection::rollback() noexcept {
+  if (database_ != nullptr && sqlite3_get_autocommit(database_) == 0) {
+    static_cast<void>(run("ROLLBACK"));
+  }
+}
+
 std::string Connection::errorText() const {
   if (database_ == nullptr) return "out of memory";
   std::string text = sqlite3_errmsg(database_);
@@ -57,6 +89,20 @@ std::string Connection::errorText() const {
     text.append(" (").append(std::generic_category().message(systemError)).append(")");
   }
   return text;
+}
+
+// Some characters would mean something in it.
+std::string uriAsItLies(const std::string& path) {
+  std::string uri = "file:";
+  for (const char c : path) {
+    if (c == '%' || c == '?' || c == '#') {
+      uri += '%';
+      plist::appendHex(uri, c);
+    } else {
+      uri.push_back(c);
+    }
+  }
+  return uri + "?mode=ro&immutable=1";
 }
 
 }  // namespace tarn::recorder

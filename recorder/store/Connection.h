@@ -5,6 +5,8 @@
 #include <optional>
 #include <string>
 
+#include "plist/Result.h"
+
 struct sqlite3;
 
 namespace tarn::recorder {
@@ -30,11 +32,21 @@ class Connection {
   // The first column of the first row; nothing when there is no row or when it fails.
   std::optional<std::int64_t> integer(const char* sql);
   std::optional<std::string> text(const char* sql);
+  // The same, telling a failure from nothing: no row is a failure too, NULL is 0 or an empty text.
+  [[nodiscard]] Result<std::int64_t> readInteger(const char* sql);
+  [[nodiscard]] Result<std::string> readText(const char* sql);
+  // The failure behind a result code, under that code and with the text of the last one; nothing when it is none.
+  [[nodiscard]] Status errorOf(int code) const;
+  // Ends a transaction that still stands: many faults end it by themselves.
+  void rollback() noexcept;
   // The text of the last failure.
   std::string errorText() const;
 
  private:
   sqlite3* database_ = nullptr;
 };
+
+// The file name as a "file:" URI that opens the file as it lies there, without locks, log and index.
+std::string uriAsItLies(const std::string& path);
 
 }  // namespace tarn::recorder

@@ -8,7 +8,6 @@
 #include <thread>
 #include <utility>
 
-#include "plist/Hex.h"
 #include "recorder/store/GlobPattern.h"
 #include "recorder/store/Statement.h"
 
@@ -18,7 +17,7 @@ namespace {
 
 constexpr int kBusyMilliseconds = 2000;
 // The pace of looking for changes: quick behind a change, gentle when it stays quiet.
-constexpr std::chrono::milliseconds kFirstLook{10};
+constexpr std::chrono::milliseconds kFirstLook{2};
 constexpr std::chrono::milliseconds kLastLook{200};
 // What a read may cost, by the bytes of the file and its log. Rows of ours cost far less; a damaged or made-up file may
 // lead into itself and would otherwise never end, or say far more than it holds.
@@ -51,20 +50,6 @@ void distrust(sqlite3* database, std::int64_t& stepsLeft) {
     sqlite3_db_config(database, option, 0, nullptr);
   }
   sqlite3_progress_handler(database, kStepsAtOnce, spendSteps, &stepsLeft);
-}
-
-// The file name as a "file:" URI, in which some characters would mean something.
-std::string uriOf(const std::string& path) {
-  std::string uri = "file:";
-  for (const char c : path) {
-    if (c == '%' || c == '?' || c == '#') {
-      uri += '%';
-      plist::appendHex(uri, c);
-    } else {
-      uri.push_back(c);
-    }
-  }
-  return uri + "?mode=ro&immutable=1";
 }
 
 EventReader::Result missing(std::string error) {
@@ -142,7 +127,7 @@ tarn::Status EventReader::open() {
   // file alone is all there is.
   if ((code == SQLITE_CANTOPEN || code == SQLITE_READONLY) && !opened_.hasLog) {
     asItLies_ = true;
-    error = openAs(uriOf(file_.string()));
+    error = openAs(uriAsItLies(file_.string()));
     if (error.ok()) return {};
   }
   connection_.close();

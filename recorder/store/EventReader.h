@@ -49,7 +49,7 @@ class EventReader {
     // file was replaced by one whose ids begin anew; its rows are then in this result.
     std::int64_t lookedUpTo = 0;
     bool more = false;  // the limit cut the result short
-    std::string error;  // when not Ok
+    std::string error;  // when not Ok; names the file
   };
 
   explicit EventReader(std::filesystem::path file);

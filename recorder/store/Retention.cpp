@@ -19,7 +19,7 @@ constexpr std::int64_t kReserveShare = 16;
 int Retention::prepare(Connection& connection) {
   connection_ = &connection;
   sqlite3* const database = connection.handle();
-  int code = oldest_.prepare(database, "SELECT id, time FROM events ORDER BY id LIMIT 1", true);
+  int code = oldest_.prepare(database, "SELECT id FROM events ORDER BY id LIMIT 1", true);
   if (code == SQLITE_OK) {
     code = pageCount_.prepare(database, "PRAGMA page_count", true);
   }
@@ -30,7 +30,20 @@ int Retention::prepare(Connection& connection) {
     code = removeBefore_.prepare(database, "DELETE FROM events WHERE id < ?1", true);
   }
   if (code == SQLITE_OK) {
-    code = removeAgedBefore_.prepare(database, "DELETE FROM events WHERE id < ?1 AND time < ?2", true);
+    code = groupTimes_.prepare(database, "SELECT first, seconds FROM event_groups ORDER BY first", true);
+  }
+  // The group in which the bound lies stays.
+  if (code == SQLITE_OK) {
+    code = removeGroups_.prepare(
+        database, "DELETE FROM event_groups WHERE first < (SELECT max(first) FROM event_groups WHERE first <= ?1)",
+        true);
+  }
+  if (code == SQLITE_OK) {
+    code = removeLosses_.prepare(database, "DELETE FROM recorder_losses WHERE last < ?1", true);
+  }
+  if (code == SQLITE_OK) {
+    code =
+        keepHoldsAfter_.prepare(database, "INSERT OR REPLACE INTO recorder_state VALUES('holds_after', ?1 - 1)", true);
   }
   pageBytes_ = connection.integer("PRAGMA page_size").value_or(4096);
   return code;
@@ -40,19 +53,56 @@ void Retention::finalize() noexcept {
   oldest_.finalize();
   pageCount_.finalize();
   freePages_.finalize();
+  groupTimes_.finalize();
   removeBefore_.finalize();
-  removeAgedBefore_.finalize();
+  removeGroups_.finalize();
+  removeLosses_.finalize();
+  keepHoldsAfter_.finalize();
 }
 
-int Retention::readOldest(std::int64_t& id, double& time, bool& any) {
+int Retention::readOldest(std::int64_t& id, bool& any) {
   const int code = oldest_.step();
   any = code == SQLITE_ROW;
   if (any) {
     id = oldest_.integer(0);
-    time = oldest_.real(1);
   }
   oldest_.reset();
   return any || code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+// The first id that isn't too old, `atMost` when all before that are; 0 when no group says that anything is.
+int Retention::readAgedBefore(double cutoff, std::int64_t atMost, std::int64_t& before) {
+  before = 0;
+  bool aged = false;
+  int code = groupTimes_.step();
+  for (; code == SQLITE_ROW; code = groupTimes_.step()) {
+    const std::int64_t first = groupTimes_.integer(0);
+    if (first >= atMost) break;
+    if (groupTimes_.real(1) >= cutoff) {
+      atMost = first;
+      break;
+    }
+    aged = true;
+  }
+  groupTimes_.reset();
+  if (aged) {
+    before = atMost;
+  }
+  return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+int Retention::removeBefore(std::int64_t id, std::uint64_t& removed) {
+  int code = removeBefore_.bind(1, id).run();
+  if (code != SQLITE_OK) return code;
+  removed += static_cast<std::uint64_t>(sqlite3_changes64(connection_->handle()));
+  code = removeGroups_.bind(1, id).run();
+  if (code == SQLITE_OK) {
+    code = removeLosses_.bind(1, id).run();
+  }
+  if (code == SQLITE_OK) {
+    code = keepHoldsAfter_.bind(1, id).run();
+  }
+  return code;
 }
 
 int Retention::readPragma(Statement& pragma, std::int64_t& value) {
@@ -76,33 +126,25 @@ int Retention::readSizes(std::int64_t& fileBytes, std::int64_t& usedBytes) {
   return code;
 }
 
-int Retention::removeSlice(double now, bool& removedAny, std::uint64_t& removed) {
+int Retention::removeSlice(double now, std::int64_t newest, bool& removedAny, std::uint64_t& removed) {
   removedAny = false;
   std::int64_t fileBytes = 0;
   std::int64_t usedBytes = 0;
-  std::int64_t oldestId = 0;
-  double oldestTime = 0;
+  std::int64_t oldest = 0;
   bool any = false;
   int code = readSizes(fileBytes, usedBytes);
   if (code == SQLITE_OK) {
-    code = readOldest(oldestId, oldestTime, any);
+    code = readOldest(oldest, any);
   }
   if (code != SQLITE_OK || !any) return code;
 
-  const double cutoff = now - limits_.maxAgeSeconds;
-  const std::int64_t behind = oldestId + kSliceIds;
-  if (usedBytes > limits_.maxBytes - limits_.maxBytes / kReserveShare) {
-    code = removeBefore_.bind(1, behind).run();
-  } else if (oldestTime < cutoff) {
-    code = removeAgedBefore_.bind(1, behind).bind(2, cutoff).run();
-  } else {
-    return SQLITE_OK;
+  std::int64_t before = std::min(oldest + kSliceIds, newest + 1);
+  if (usedBytes <= limits_.maxBytes - limits_.maxBytes / kReserveShare) {
+    code = readAgedBefore(now - limits_.maxAgeSeconds, before, before);
   }
-  if (code == SQLITE_OK) {
-    removedAny = true;
-    removed += static_cast<std::uint64_t>(sqlite3_changes64(connection_->handle()));
-  }
-  return code;
+  if (code != SQLITE_OK || before <= oldest) return code;
+  removedAny = true;
+  return removeBefore(before, removed);
 }
 
 int Retention::giveBackPages(bool& gaveAny) {
@@ -123,11 +165,12 @@ int Retention::giveBackPages(bool& gaveAny) {
   return read;
 }
 
-int Retention::expire(double now, std::chrono::steady_clock::time_point deadline, std::uint64_t& removed) {
+int Retention::expire(double now, std::int64_t newest, std::chrono::steady_clock::time_point deadline,
+                      std::uint64_t& removed) {
   bool more = true;
   int code = SQLITE_OK;
   do {
-    code = removeSlice(now, more, removed);
+    code = removeSlice(now, newest, more, removed);
     if (code == SQLITE_OK && !more) {
       code = giveBackPages(more);
     }

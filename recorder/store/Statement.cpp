@@ -26,6 +26,11 @@ Statement& Statement::bind(int place, double value) noexcept {
   return *this;
 }
 
+Statement& Statement::bindBytes(int place, std::string_view bytes) noexcept {
+  sqlite3_bind_blob64(statement_, place, bytes.data(), bytes.size(), nullptr /* SQLITE_STATIC */);
+  return *this;
+}
+
 Statement& Statement::bind(int place, std::string_view text) noexcept {
   const char* const start = text.data() != nullptr ? text.data() : "";
   sqlite3_bind_text64(statement_, place, start, text.size(), nullptr /* SQLITE_STATIC */, SQLITE_UTF8);
@@ -51,6 +56,14 @@ int Statement::run() noexcept {
 
 bool Statement::isNull(int column) const noexcept {
   return sqlite3_column_type(statement_, column) == SQLITE_NULL;
+}
+
+bool Statement::isReal(int column) const noexcept {
+  return sqlite3_column_type(statement_, column) == SQLITE_FLOAT;
+}
+
+bool Statement::isText(int column) const noexcept {
+  return sqlite3_column_type(statement_, column) == SQLITE_TEXT;
 }
 
 std::int64_t Statement::integer(int column) const noexcept {

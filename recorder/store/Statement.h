@@ -27,6 +27,7 @@ class Statement {
   Statement& bind(int place, std::int64_t value) noexcept;
   Statement& bind(int place, double value) noexcept;
   Statement& bind(int place, std::string_view text) noexcept;
+  Statement& bindBytes(int place, std::string_view bytes) noexcept;
 
   // One step: SQLITE_ROW, SQLITE_DONE or what went wrong.
   [[nodiscard]] int step() noexcept;
@@ -36,6 +37,8 @@ class Statement {
 
   // Columns count from 0. A text lives until the next step.
   bool isNull(int column) const noexcept;
+  bool isReal(int column) const noexcept;
+  bool isText(int column) const noexcept;
   std::int64_t integer(int column) const noexcept;
   double real(int column) const noexcept;
   std::string_view text(int column) const noexcept;

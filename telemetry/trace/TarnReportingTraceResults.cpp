@@ -1,6 +1,5 @@
 #include "telemetry/trace/TarnReportingTraceResults.h"
 
-#include <algorithm>
 #include <cstdint>
 #include <unordered_map>
 #include <utility>
@@ -11,6 +10,7 @@
 #include "platform/LocalCalendar.h"
 #include "platform/ProcessControl.h"
 #include "platform/ProcessEnvironment.h"
+#include "service/vocabulary/FileNameText.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
 #include "service/vocabulary/TarnReportingUtility.h"
@@ -60,11 +60,7 @@ std::shared_ptr<platform::TraceAnalysisLibrary> loadLibrary() {
 // The name of a result file that the configuration doesn't name.
 std::string generatedFileName(const TarnReportingSession& session) {
   const platform::Facilities& facilities = TarnReportingFacilities();
-  std::string application = TarnReportingUtilityRetrieveAppName(session.configuration());
-  // What no file name can hold.
-  std::replace_if(
-      application.begin(), application.end(), [](char character) { return character == '/' || character == '\0'; },
-      '_');
+  const std::string application = fileNameText(TarnReportingUtilityRetrieveAppName(session.configuration()));
   std::string name = facilities.localCalendar.format(facilities.clock.epochSeconds(), "yyyyMMdd-HHmmssZ");
   name += "-tarnkit-" + application + "-";
   name += TarnReportingUtilityGenerateServiceNameFromServiceType(session.serviceType());

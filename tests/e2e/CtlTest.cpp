@@ -40,6 +40,55 @@ TEST_F(Ctl, AServiceThatIsNotThereIs69) {
   EXPECT_EQ(ctl({"run"}, "").status, 0);
 }
 
+TEST_F(Ctl, WaitIsForTheServiceToBeThere) {
+  const auto waiting = startCtl({"--wait=8", "status"});
+  const auto script = startCtl({"run", "--wait", "-"}, "{\"op\":\"getAllReporters\"}\n");
+  ASSERT_TRUE(startService());
+  EXPECT_EQ(waiting->wait(), 0) << waiting->complaints();
+  EXPECT_EQ(script->wait(), 0) << script->complaints();
+  Process::Setup impatient;
+  impatient.words = {TARNREPORTINGCTL, "--socket", directory_ / "none", "--wait=0.05", "status"};
+  const Finished tired = runToEnd(impatient, directory_);
+  EXPECT_EQ(tired.status, 69);
+  EXPECT_NE(tired.complaints.find("(waited 0.05 s)"), std::string::npos) << tired.complaints;
+}
+
+TEST_F(Ctl, AServiceThatDoesNotAnswerInTimeIs69) {
+  ASSERT_TRUE(startService());
+  service().signal(SIGSTOP);
+  const std::vector<std::vector<std::string>> rows = {
+      {"status"}, {"reporters"}, {"run"}, {"events", "--settled"}, {"events", "--wait=0.1"}};
+  for (const auto& row : rows) {
+    std::vector<std::string> words = {"--timeout", "0.1"};
+    words.insert(words.end(), row.begin(), row.end());
+    const Finished finished = ctl(words, "{\"op\":\"getAllReporters\"}\n");
+    EXPECT_EQ(finished.status, 69) << row.front();
+    EXPECT_NE(finished.complaints.find("does not answer within 0.1 s"), std::string::npos) << finished.complaints;
+  }
+  service().signal(SIGCONT);
+  EXPECT_EQ(ctl({"status"}).status, 0);
+}
+
+TEST_F(Ctl, TheEnvironmentNamesTheSocket) {
+  ASSERT_TRUE(startService());
+  Process::Setup setup;
+  setup.words = {TARNREPORTINGCTL, "status"};
+  setup.environment = {"TARNREPORTING_SOCKET=" + socket()};
+  const Finished finished = runToEnd(setup, directory_);
+  EXPECT_EQ(finished.status, 0) << finished.complaints;
+  EXPECT_TRUE(finished.output.starts_with("the service is up at " + socket() + "\n")) << finished.output;
+}
+
+TEST_F(Ctl, SettledEventsHoldAllThatCameBefore) {
+  ASSERT_TRUE(startService());
+  for (int round = 1; round <= 5; ++round) {
+    play("{\"op\":\"sendMessage\",\"category\":\"Generic\",\"type\":\"Error\",\"message\":{\"a\":1}}\n");
+    const Finished listed = ctl({"events", "--settled", "--json", "--name", "sys.oxbow.standalone.Generic.Error"});
+    EXPECT_EQ(listed.status, 0) << listed.complaints;
+    EXPECT_EQ(jsonLines(listed.output).size(), static_cast<std::size_t>(round));
+  }
+}
+
 TEST_F(Ctl, EveryCommandHasItsHelp) {
   for (const std::vector<std::string>& words : {std::vector<std::string>{"--help"},
                                                 {"run", "--help"},

@@ -2,6 +2,8 @@
 #include <csignal>
 
 #include <algorithm>
+#include <filesystem>
+#include <fstream>
 
 #include "tests/e2e/ServiceFixture.h"
 
@@ -66,6 +68,15 @@ TEST_F(EventsCommand, SaysThatThereIsNoRecorder) {
   const Finished finished = ctl({"events"});
   EXPECT_EQ(finished.status, 1);
   EXPECT_NE(finished.complaints.find("recorder.sqlite3"), std::string::npos);
+}
+
+TEST_F(EventsCommand, NamesAFileThatIsNoRecordersOnce) {
+  std::filesystem::create_directories(state());
+  const std::string file = state() + "/recorder.sqlite3";
+  std::ofstream(file) << "something else";
+  const Finished finished = ctl({"events"});
+  EXPECT_EQ(finished.status, 1);
+  EXPECT_EQ(finished.complaints, "tarnreportingctl: can't read " + file + ": file is not a database\n");
 }
 
 TEST_F(EventsCommand, FollowPrintsWhatIsThereThenWhatComesUntilInterrupted) {

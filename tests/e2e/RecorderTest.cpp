@@ -1,4 +1,5 @@
 // What the recorder's file goes through: damage, retention, patterns; and that the ledger adds up.
+#include <csignal>
 #include <filesystem>
 
 #include "tests/e2e/ServiceFixture.h"
@@ -101,6 +102,27 @@ TEST_F(RecorderFile, TheLedgerAddsUpAtAnyMomentAndIsZeroAtRest) {
   EXPECT_EQ(ledger.at("recorder_failed"), 0);
   EXPECT_EQ(ledger.at("sessions"), 1);
   EXPECT_GE(ledger.at("frames_received"), ledger.at("replies_sent"));
+}
+
+TEST_F(RecorderFile, CheckTellsWhatIsLostByItsIdAndNeedsNoService) {
+  EXPECT_EQ(ctl({"check", "--store"}).status, 1) << "there is no file yet";
+  ASSERT_TRUE(startService());
+  play("{\"op\":\"sendMessage\",\"category\":4,\"type\":1,\"message\":{}}\n");
+  const std::size_t count = eventsOnceThereAre(2, "*").size();
+  const Finished beside = ctl({"check", "--store"});
+  EXPECT_EQ(beside.status, 0) << beside.complaints;
+  EXPECT_EQ(beside.output.substr(0, 6), "whole ");
+  EXPECT_GE(count, 2U);
+  ASSERT_EQ(stopService(SIGTERM), 0);
+  std::string bytes = contentOf(database());
+  const std::size_t at = bytes.rfind("Playback.Start");
+  ASSERT_NE(at, std::string::npos);
+  bytes[at] = 'p';
+  writeFile(database(), bytes);
+  const Finished alone = ctl({"check", "--store"});
+  EXPECT_EQ(alone.status, 1);
+  EXPECT_NE(alone.output.find("\nlost "), std::string::npos) << alone.output;
+  EXPECT_EQ(ctl({"check"}).status, 64);
 }
 
 }  // namespace

@@ -1,5 +1,8 @@
 // Settings: the defaults store, the notifications and the device properties, as a running service sees them.
+#include <unistd.h>
+
 #include <csignal>
+#include <set>
 
 #include "tests/e2e/ServiceFixture.h"
 
@@ -25,6 +28,46 @@ TEST_F(Settings, ReportingIsOffWhenTheDefaultsSaySo) {
   EXPECT_EQ(error.at("domain"), "sys.oxbow.audio.reporting");
   EXPECT_EQ(error.at("code"), 1);
   EXPECT_TRUE(replyTo(replies, 2).at("result").is_null());
+}
+
+TEST_F(Settings, WhileReportingIsOffASessionStillSendsItsOwnSummaryAndAConnectionItsUptime) {
+  ASSERT_EQ(ctl({"defaults", "write", "sys.oxbow.tarnkit", "disable_reporting", "true"}).status, 0);
+  ASSERT_TRUE(startService());
+  play(R"({"op":"createReportingSession","reporterID":1}
+{"op":"setServiceType","reporterID":1,"serviceType":"longformaudio"}
+{"op":"startReportingSessionForID","reporterID":1}
+{"op":"sendMessage","reporterIDs":[1],"category":"Playback","type":"Start","message":{"a":1}}
+{"op":"sendMessage","category":"Playback","type":"Start","message":{"a":2}}
+{"op":"stopReportingSessionForID","reporterID":1}
+)");
+  ASSERT_EQ(stopService(SIGTERM), 0);
+  std::set<std::string> kinds;
+  for (const Event& event : events()) {
+    kinds.insert(event.backend + " " + event.name);
+  }
+  EXPECT_EQ(kinds, (std::set<std::string>{"rtc createSession", "rtc flush", "rtc sendMessage",
+                                          "tally sys.oxbow.longformaudio.Session_Generic.Summary",
+                                          "tally sys.oxbow.tarnkit.Session_Generic.Summary",
+                                          "tally sys.oxbow.tarnkit.tarnreportingclientuptime"}));
+}
+
+TEST_F(Settings, WithoutTheRecorderAllIsServedAndNothingIsWritten) {
+  writeFile(directory_ / "service.toml", "[recorder]\nenabled = false\n");
+  ASSERT_TRUE(startService({"--config", directory_ / "service.toml"}));
+  const auto replies = play(R"({"op":"createReportingSession","reporterID":1}
+{"op":"setServiceType","reporterID":1,"serviceType":"longformaudio"}
+{"op":"startReportingSessionForID","reporterID":1}
+{"op":"sendMessage","reporterIDs":[1],"category":"Playback","type":"Start","message":{"a":1}}
+{"op":"stopReportingSessionForID","reporterID":1}
+)");
+  for (const json& reply : replies) {
+    EXPECT_TRUE(reply.at("error").is_null()) << reply;
+  }
+  EXPECT_EQ(status().at("recorder_handed_over"), 0);
+  EXPECT_EQ(stopService(SIGTERM), 0);
+  EXPECT_NE(::access((state() + "/recorder.sqlite3").c_str(), F_OK), 0);
+  const Finished listed = ctl({"events"});
+  EXPECT_EQ(listed.status, 1);
 }
 
 TEST_F(Settings, AChangeOfADefaultReachesTheRunningServiceWithItsNotification) {

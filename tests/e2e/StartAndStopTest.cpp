@@ -16,25 +16,64 @@ namespace {
 
 class StartAndStop : public ServiceFixture {
  protected:
-  // A session that runs, with that many different messages, over a connection that stays open.
-  std::unique_ptr<client::ClientConnection> sendMessages(int count) {
+  // A session that runs, with that many different messages, over a connection that stays open. Two connections need
+  // two IDs: a message reaches whoever has its ID.
+  std::unique_ptr<client::ClientConnection> sendMessages(int count, std::int64_t reporterID = 1) {
     auto client = connect();
-    EXPECT_TRUE(client->call(client::createReportingSession(1)).ok());
-    EXPECT_EQ(client->send(client::startReportingSessionForID(1)), client::SendStatus::Sent);
+    EXPECT_TRUE(client->call(client::createReportingSession(reporterID)).ok());
+    EXPECT_EQ(client->send(client::startReportingSessionForID(reporterID)), client::SendStatus::Sent);
     for (int index = 0; index < count; ++index) {
-      EXPECT_TRUE(client->call(client::sendMessage({{"number", index}}, 4, 1, std::vector<std::int64_t>{1})).ok());
+      EXPECT_TRUE(
+          client->call(client::sendMessage({{"number", index}}, 4, 1, std::vector<std::int64_t>{reporterID})).ok());
     }
     return client;
   }
   std::size_t recordedMessages() { return events("sys.oxbow.tarnkit.Playback.Start").size(); }
 };
 
-TEST_F(StartAndStop, TermCommitsEverythingStopsNoSessionAndExitsWith0) {
+TEST_F(StartAndStop, TermEndsEachClientInOrderCommitsEverythingAndExitsWith0) {
   ASSERT_TRUE(startService());
-  const auto client = sendMessages(300);
+  const auto first = sendMessages(300);
+  const auto second = sendMessages(1, 2);
   EXPECT_EQ(stopService(SIGTERM), 0);
-  EXPECT_EQ(recordedMessages(), 300U);
-  EXPECT_TRUE(events("*.Summary").empty());
+  EXPECT_EQ(recordedMessages(), 301U);
+  const auto summaries = events("sys.oxbow.tarnkit.Session_Generic.Summary");
+  ASSERT_EQ(summaries.size(), 2U);
+  std::vector<int> messages = {summaries[0].payload.at("num_messages"), summaries[1].payload.at("num_messages")};
+  std::sort(messages.begin(), messages.end());
+  EXPECT_EQ(messages, (std::vector<int>{1, 300}));
+  EXPECT_EQ(events("sys.oxbow.tarnkit.tarnreportingclientuptime").size(), 2U + 1U);  // and the asker of startService
+  EXPECT_TRUE(logSays("reason=service-stopping")) << serviceLog();
+}
+
+TEST_F(StartAndStop, TermServesWhatWasSentBefore) {
+  ASSERT_TRUE(startService());
+  const auto client = connect();
+  EXPECT_TRUE(client->call(client::createReportingSession(1)).ok());
+  EXPECT_EQ(client->send(client::startReportingSessionForID(1)), client::SendStatus::Sent);
+  for (int index = 0; index < 2000; ++index) {
+    ASSERT_EQ(client->send(client::sendMessage({{"number", index}}, 4, 1, std::vector<std::int64_t>{1})),
+              client::SendStatus::Sent);
+  }
+  ASSERT_TRUE(client->flush());
+  EXPECT_EQ(stopService(SIGTERM), 0);
+  EXPECT_EQ(recordedMessages(), 2000U);
+  EXPECT_EQ(events("sys.oxbow.tarnkit.Session_Generic.Summary").size(), 1U);
+}
+
+TEST_F(StartAndStop, TermStopsTheSingleMessageSession) {
+  ASSERT_TRUE(startService());
+  play("{\"op\":\"sendMessage\",\"category\":\"Generic\",\"type\":\"Generic\",\"message\":{\"a\":1}}\n");
+  EXPECT_EQ(stopService(SIGTERM), 0);
+  EXPECT_EQ(events("sys.oxbow.standalone.Generic.Generic").size(), 1U);
+  std::vector<std::string> rtc;
+  for (const Event& event : events()) {
+    if (event.backend == "rtc") {
+      rtc.push_back(event.name);
+    }
+  }
+  ASSERT_FALSE(rtc.empty());
+  EXPECT_EQ(rtc.back(), "flush");
 }
 
 TEST_F(StartAndStop, IntDoesAsTermDoes) {
@@ -42,6 +81,7 @@ TEST_F(StartAndStop, IntDoesAsTermDoes) {
   const auto client = sendMessages(50);
   EXPECT_EQ(stopService(SIGINT), 0);
   EXPECT_EQ(recordedMessages(), 50U);
+  EXPECT_EQ(events("sys.oxbow.tarnkit.Session_Generic.Summary").size(), 1U);
 }
 
 TEST_F(StartAndStop, KillServiceCommitsEverythingAndExitsWith2) {

@@ -1,6 +1,7 @@
 #include "host/HostSetup.h"
 
 #include <gtest/gtest.h>
+#include <sys/stat.h>
 
 #include <filesystem>
 
@@ -43,6 +44,39 @@ TEST_F(HostSetupTest, BadConfigurationIsRefusedBeforeAnythingIsMade) {
   bad.configurationFile = folder_.path("c.toml");
   EXPECT_EQ(statusOf(bad, folder_.path("c.toml") + ":1: unknown section [nothing]"), kExitConfiguration);
   EXPECT_FALSE(std::filesystem::exists(folder_.path("state")));
+}
+
+TEST_F(HostSetupTest, InstalledConfigurationIsReadWhenNoneIsNamedAndMayBeAbsent) {
+  ServiceOptions installed = options();
+  installed.defaultConfigurationFile = folder_.path("installed.toml");
+  EXPECT_EQ(statusOf(installed, ""), 0);
+  folder_.write("installed.toml", "[nothing]\n");
+  EXPECT_EQ(statusOf(installed, folder_.path("installed.toml") + ":1: unknown section [nothing]"), kExitConfiguration);
+  folder_.write("named.toml", "");
+  installed.configurationFile = folder_.path("named.toml");
+  EXPECT_EQ(statusOf(installed, ""), 0);
+}
+
+TEST_F(HostSetupTest, WhatIsMadeIsForUserAndGroupAlone) {
+  const int status = testing::inChild([&] {
+    ::umask(0);
+    HostSetup setup;
+    if (setup.prepare(options()).failed()) return 1;
+    std::filesystem::create_directory(folder_.path("made"));
+    return ::umask(0) == 027 ? 0 : 2;
+  });
+  EXPECT_EQ(status, 0);
+  EXPECT_EQ(std::filesystem::status(folder_.path("state")).permissions(), std::filesystem::perms(0750));
+  EXPECT_EQ(std::filesystem::status(folder_.path("made")).permissions(), std::filesystem::perms(0750));
+}
+
+TEST_F(HostSetupTest, ATighterMaskOfTheCallerStays) {
+  EXPECT_EQ(testing::inChild([&] {
+              ::umask(077);
+              HostSetup setup;
+              return setup.prepare(options()).failed() || ::umask(0) != 077 ? 1 : 0;
+            }),
+            0);
 }
 
 TEST_F(HostSetupTest, BadDevicePropertiesAreRefusedAsConfiguration) {

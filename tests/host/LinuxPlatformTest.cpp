@@ -3,6 +3,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <filesystem>
 #include <functional>
 #include <future>
@@ -30,7 +31,8 @@ using testing::TestClient;
 class NotedManager final : public ServiceManager {
  public:
   void notifyReady() override { ready = true; }
-  void notifyStopping() override {
+  void notifyStopping(std::chrono::microseconds longest) override {
+    bounds.push_back(longest);
     if (onStopping) {
       onStopping();
     }
@@ -39,6 +41,7 @@ class NotedManager final : public ServiceManager {
 
   bool ready = false;
   std::function<void()> onStopping;
+  std::vector<std::chrono::microseconds> bounds;  // that it was told of the end
 };
 
 class LinuxPlatformTest : public ::testing::Test {
@@ -232,6 +235,71 @@ TEST_F(LinuxPlatformTest, WorkThatABackEndKeepsWaitingIsLeftUndoneAndTold) {
   EXPECT_EQ(recorded(), (std::vector<std::string>{"wattlog event"}));
 }
 
+TEST_F(LinuxPlatformTest, EndInOrderServesWhatClientsSentAndThenTheirEnds) {
+  make();
+  ASSERT_EQ(platform_->start().text(), "");
+  ASSERT_EQ(listen(), "");
+  TestClient first(socket());
+  TestClient second(socket());
+  // All of it lies in the sockets when the end begins.
+  ASSERT_TRUE(first.request(1, testing::requestOf(wire::Operation::GetAllReporters)));
+  ASSERT_TRUE(second.request(1, testing::requestOf(wire::Operation::CreateReportingSession, 7)));
+  ASSERT_TRUE(second.request(2, testing::requestOf(wire::Operation::DestroyReportingSession, 7)));
+  std::vector<std::string> eventsBefore;
+  platform_->loop().queue()->asyncAfter(50ms, [&] {
+    platform_->endClients([&] { eventsBefore = service_->events; });
+    platform_->endClients([] { ADD_FAILURE(); });
+  });
+  platform_->serve();
+  EXPECT_TRUE(first.reply());
+  EXPECT_TRUE(first.ended());
+  EXPECT_TRUE(second.reply());
+  EXPECT_TRUE(second.reply());
+  EXPECT_TRUE(second.ended());
+  std::sort(eventsBefore.begin(), eventsBefore.end());
+  EXPECT_EQ(eventsBefore, (std::vector<std::string>{"1 getAllReporters", "1 invalidated", "2 createReportingSession 7",
+                                                    "2 destroyReportingSession 7", "2 invalidated"}));
+  ASSERT_EQ(manager_.bounds.size(), 2U);  // for the clients, then for the commit
+  EXPECT_EQ(manager_.bounds[0], 10s);
+}
+
+TEST_F(LinuxPlatformTest, EndInOrderEndsHeldConnectionsOnceTheyMayGoOn) {
+  configuration_.recorder.highWaterEvents = 1;
+  configuration_.recorder.lowWaterEvents = 0;
+  make();
+  record("event");  // stays, as nothing writes before the start
+  ASSERT_EQ(listen(), "");
+  TestClient client(socket());
+  ASSERT_TRUE(client.request(1, messageRequest({{"a", 1}})));
+  ASSERT_TRUE(client.request(2, messageRequest({{"a", 2}})));
+  auto& queue = *platform_->loop().queue();
+  queue.asyncAfter(50ms, [this] { platform_->endClients([] {}); });
+  queue.asyncAfter(100ms, [this] { EXPECT_EQ(platform_->start().text(), ""); });
+  platform_->serve();
+  EXPECT_TRUE(client.reply());
+  EXPECT_TRUE(client.reply());
+  EXPECT_TRUE(client.ended());
+}
+
+TEST_F(LinuxPlatformTest, EndInOrderThatGetsStuckCommitsAndExitsInTime) {
+  configuration_.limits.endTime = 100ms;
+  const auto begin = std::chrono::steady_clock::now();
+  const int status = testing::inChild([this] {
+    make();
+    if (platform_->start().failed() || !listen().empty()) return 1;
+    platform_->loop().queue()->async([this] { platform_->endClients([] {}); });
+    platform_->loop().queue()->async([this] {
+      record("event");
+      std::this_thread::sleep_for(1h);  // somebody's work that never ends
+    });
+    platform_->serve();
+    return 1;
+  });
+  EXPECT_EQ(status, 0);
+  EXPECT_LT(std::chrono::steady_clock::now() - begin, 20s);
+  EXPECT_EQ(recorded(), (std::vector<std::string>{"wattlog event"}));
+}
+
 TEST_F(LinuxPlatformTest, ExitOfTheProcessMakesSafeWhatWasTaken) {
   const int status = testing::inChild([this] {
     make();
@@ -257,6 +325,21 @@ TEST_F(LinuxPlatformTest, HandsOutEverythingThatAMachineHasOnTheConfiguredPaths)
   EXPECT_TRUE(facilities.flume && facilities.rtcReporting && facilities.performanceTrace);
   EXPECT_TRUE(facilities.traceAnalysis && facilities.perfDataWriters && facilities.signposts);
   EXPECT_FALSE(facilities.accessories);
+}
+
+TEST_F(LinuxPlatformTest, WithoutTheRecorderNothingStandsInAndNothingIsWritten) {
+  configuration_.recorderEnabled = false;
+  make();
+  ASSERT_EQ(platform_->start().text(), "");
+  ASSERT_EQ(listen(), "");
+  const platform::Facilities& facilities = platform_->facilities();
+  EXPECT_FALSE(facilities.wattlog || facilities.pylon || facilities.snare || facilities.tattle || facilities.gyre);
+  EXPECT_FALSE(facilities.rtcReporting);
+  EXPECT_TRUE(facilities.flume && facilities.performanceTrace && facilities.signposts);
+  EXPECT_FALSE(facilities.tally.eventIsInUse("sys.oxbow.tarnkit.Playback.Start"));
+  facilities.tally.sendEventLazy("event", [] { return plist::Dictionary(); });
+  end();
+  EXPECT_FALSE(std::filesystem::exists(folder_.path("recorder.sqlite3")));
 }
 
 TEST_F(LinuxPlatformTest, TemporaryFolderThatCannotBeMadeFailsTheStart) {

@@ -106,7 +106,7 @@ class IncludeGraph(unittest.TestCase):
                      "service/vocabulary/DataSerialize.cpp", "session/Log.cpp", "diagnostics/Pylon.cpp",
                      "testing/FakeClock.cpp"):
             self.assertEqual(found(include_graph, {path: line}), [(path, 1)])
-        for path in ("host/log/HostLog.cpp", "recorder/store/Database.cpp", "tools/ctl/Events.cpp",
+        for path in ("host/log/PrefixedLog.cpp", "recorder/store/Database.cpp", "tools/ctl/Events.cpp",
                      "tests/e2e/RunTest.cpp", "bench/Peers.cpp", "fuzz/FrameFuzzer.cpp"):
             self.assertEqual(found(include_graph, {path: line}), [])
 

@@ -2,7 +2,9 @@
 
 import argparse
 import os
+import shlex
 import shutil
+import socket
 import subprocess
 import sys
 import tempfile
@@ -70,7 +72,7 @@ class InstalledTree(unittest.TestCase):
         with open(self.at("etc/tarnreporting/tarnreportingd.toml"), encoding="utf-8") as file:
             lines = file.read().splitlines()
         keys = [line[1:] for line in lines if line.startswith("#") and not line.startswith("# ") and "=" in line]
-        self.assertEqual(len(keys), 12)  # all but the one that is set
+        self.assertEqual(len(keys), 13)  # all but the one that is set
         shown = os.path.join(self.folder, "shown.toml")
         with open(shown, "w", encoding="utf-8") as file:
             file.write("\n".join(line[1:] if line[1:] in keys else line for line in lines) + "\n")
@@ -83,7 +85,7 @@ class InstalledTree(unittest.TestCase):
         self.assertEqual(service["Type"], ["notify"])
         self.assertEqual(service["StateDirectory"], ["tarnreporting"])
         self.assertRegex(service["WatchdogSec"][0], r"^[1-9][0-9]*s$")
-        program, *arguments = service["ExecStart"][0].split()
+        program, *arguments = shlex.split(service["ExecStart"][0])
         self.assertEqual((os.path.isabs(program), os.path.basename(program)), (True, "tarnreportingd"))
         self.assertNotIn("@", " ".join(arguments))
         sockets = self.settings("lib/systemd/system/tarnreportingd.socket")
@@ -92,6 +94,30 @@ class InstalledTree(unittest.TestCase):
         with open(self.at("lib/sysusers.d/tarnreporting.conf"), encoding="utf-8") as file:
             self.assertIn("u " + service["User"][0] + " ", file.read())
         self.assertEqual(sockets["SocketUser"], service["User"])
+
+    def test_the_installed_configuration_is_read_and_may_be_absent(self):
+        path = self.at("etc/tarnreporting/tarnreportingd.toml")
+        command = [self.at("bin", "tarnreportingd"), "--state-dir", path + "/none",
+                   "--socket", os.path.join(self.folder, "none.sock")]
+        with open(path, encoding="utf-8") as file:
+            shown = file.read()
+        try:
+            with open(path, "w", encoding="utf-8") as file:
+                file.write("[nothing]\n")
+            done = run(*command)
+            self.assertEqual((done.returncode, path in done.stderr), (78, True), done.stderr)
+            os.remove(path)
+            self.assertEqual(run(*command[:1], "--state-dir", self.at("bin/tarnreportingd/none"),
+                                 *command[3:]).returncode, 1)
+        finally:
+            with open(path, "w", encoding="utf-8") as file:
+                file.write(shown)
+
+    def test_the_unit_has_its_bounds(self):
+        service = self.settings("lib/systemd/system/tarnreportingd.service")
+        for bound in ("MemoryMax", "TasksMax", "LimitNOFILE"):
+            self.assertRegex(service[bound][0], r"^[1-9][0-9]*[MG]?$")
+        self.assertEqual(service["UMask"], ["0027"])
 
     def settings(self, path):
         found = {}
@@ -113,6 +139,52 @@ class InstalledTree(unittest.TestCase):
         done = run(os.path.join(build, "consumer"), absent)
         self.assertEqual(done.returncode, 0, done.stdout + done.stderr)
         self.assertIn(absent, done.stdout)
+
+
+# Where the configuration of a prefix lies.
+CONFIGURATIONS = {"/usr": "/etc", "/usr/local": "/usr/local/etc", "/opt/x": "/etc/opt/x"}
+
+
+class StagedPackage(unittest.TestCase):
+    """Under each prefix that a package may have: everything is in its place, and the unit's own command line serves."""
+
+    def test_the_unit_of_every_prefix_starts_a_service(self):
+        for prefix, configuration in CONFIGURATIONS.items():
+            with self.subTest(prefix), tempfile.TemporaryDirectory(prefix="tarnstage") as stage:
+                done = subprocess.run(["cmake", "--install", options.build, "--prefix", prefix], capture_output=True,
+                                      text=True, env={**os.environ, "DESTDIR": stage}, stdin=subprocess.DEVNULL)
+                self.assertEqual(done.returncode, 0, done.stdout + done.stderr)
+                self.assertTrue(os.path.isfile(f"{stage}{configuration}/tarnreporting/tarnreportingd.toml"))
+                self.serve(stage, prefix)
+
+    def serve(self, stage, prefix):
+        unit = f"{stage}{prefix}/lib/systemd/system/tarnreportingd.service"
+        with open(unit, encoding="utf-8") as file:
+            command = shlex.split(next(line for line in file if line.startswith("ExecStart=")).split("=", 1)[1])
+        self.assertEqual(command[0], f"{prefix}/bin/tarnreportingd")
+        path = stage + "/socket"
+        with socket.socket(socket.AF_UNIX) as listener:
+            listener.bind(path)
+            listener.listen()
+            words = [word.replace("%S", stage) for word in command]
+            words[0] = stage + words[0]
+
+            def hand_over():  # as the service manager does
+                os.dup2(listener.fileno(), 3)
+
+            service = subprocess.Popen(["sh", "-c", 'export LISTEN_FDS=1 LISTEN_PID=$$; exec "$@"', "sh", *words],
+                                       stdin=subprocess.DEVNULL, stderr=subprocess.PIPE, text=True,
+                                       preexec_fn=hand_over, pass_fds=(3,))
+        try:
+            ctl = stage + prefix + "/bin/tarnreportingctl"
+            done = run(ctl, "--socket", path, "--wait=20", "status")
+            self.assertEqual(done.returncode, 0, done.stdout + done.stderr)
+            self.assertIn("the service is up at " + path, done.stdout)
+        finally:
+            service.terminate()
+            _, said = service.communicate(timeout=30)
+        self.assertEqual(service.returncode, 0, said)
+        self.assertTrue(os.path.isfile(stage + "/tarnreporting/recorder.sqlite3"))
 
 
 if __name__ == "__main__":

@@ -2,6 +2,7 @@
 #include <gtest/gtest.h>
 
 #include "plist/CalendarDate.h"
+#include "plist/EscapedText.h"
 #include "plist/Hex.h"
 
 namespace tarn::plist {
@@ -21,6 +22,41 @@ TEST(Hex, AByteIsTwoSmallDigits) {
   appendHex(text, std::string_view("\x00\x0A\x9F\xFF", 4));
   appendHex(text, '\x7E');
   EXPECT_EQ(text, "x000a9fff7e");
+}
+
+std::string printable(std::string_view text, LineEnds lineEnds = LineEnds::Escaped) {
+  std::string shown;
+  appendPrintable(shown, text, lineEnds);
+  return shown;
+}
+
+TEST(Printable, PlainTextStaysAsItIs) {
+  EXPECT_EQ(printable(""), "");
+  EXPECT_EQ(printable(" ~\\\"{}"), " ~\\\"{}");
+  EXPECT_EQ(printable("\u00a0\u00e9\u4e2d\U0001f600"), "\u00a0\u00e9\u4e2d\U0001f600");
+}
+
+TEST(Printable, ControlsAreWrittenOut) {
+  EXPECT_EQ(printable(std::string_view("\0\x1f\x20\x7e\x7f", 5)), "\\u0000\\u001f ~\\u007f");
+  EXPECT_EQ(printable("\u0080\u009f\u00a0"), "\\u0080\\u009f\u00a0");
+}
+
+TEST(Printable, WhatTurnsOrEndsALineIsWrittenOut) {
+  EXPECT_EQ(printable("\u061b\u061c\u061d"), "\u061b\\u061c\u061d");
+  EXPECT_EQ(printable("\u200d\u200e\u200f\u2010"), "\u200d\\u200e\\u200f\u2010");
+  EXPECT_EQ(printable("\u2027\u2028\u2029\u202a\u202e\u202f"), "\u2027\\u2028\\u2029\\u202a\\u202e\u202f");
+  EXPECT_EQ(printable("\u2065\u2066\u2069\u206a"), "\u2065\\u2066\\u2069\u206a");
+}
+
+TEST(Printable, BytesThatAreNoCharacterAreWrittenOut) {
+  EXPECT_EQ(printable("a\x9b\xff\xc3"), "a\\u009b\\u00ff\\u00c3");
+  EXPECT_EQ(printable("\xe2\x80z"), "\\u00e2\\u0080z");
+}
+
+TEST(Printable, LineEndsAreAsAskedFor) {
+  EXPECT_EQ(printable("a\n\nb\r\n"), "a\\u000a\\u000ab\\u000d\\u000a");
+  EXPECT_EQ(printable("a\n\nb\r\n", LineEnds::Indented), "a\n\t\n\tb\\u000d\n\t");
+  EXPECT_EQ(printable("a\n\nb\r\n", LineEnds::Kept), "a\n\nb\\u000d\n");
 }
 
 TEST(CalendarDate, MomentsOfTheYears1To9999HaveOne) {

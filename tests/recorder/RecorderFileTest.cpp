@@ -1,4 +1,10 @@
 // What becomes of files that can't be used, and of files that go away.
+#include <fcntl.h>
+
+#include <cerrno>
+#include <cstdio>
+
+#include "recorder/store/StoreReport.h"
 #include "tests/recorder/RecorderFixture.h"
 
 namespace tarn::recorder {
@@ -24,6 +30,24 @@ class RecorderFileTest : public RecorderFixture {
     EXPECT_TRUE(log_.contains(platform::LogLevel::Error, "set aside as recorder.sqlite3.damaged-"));
     EXPECT_EQ(filesSetAside().size(), 1U);
     EXPECT_EQ(ask(file(), "SELECT id, name FROM events"), std::vector<std::string>{"1|fresh"});
+  }
+  // The same for a file of 3000 events, of which some can still be read.
+  void expectTheRestCarriedOver() {
+    start();
+    record("fresh");
+    ASSERT_TRUE(flush());
+    stop();
+    EXPECT_EQ(errors(), 1U);
+    EXPECT_EQ(filesSetAside().size(), 1U);
+    EXPECT_EQ(askOne(file(), "SELECT max(id) FROM events"), "3001");
+    EXPECT_GT(std::stol(askOne(file(), "SELECT count(*) FROM events")), 1000);
+    EXPECT_EQ(askOne(file(), "SELECT count(*) FROM events WHERE id <= 3000 AND name <> 'event' || (id - 1)"), "0");
+    const auto report = inspectStore(file());
+    ASSERT_FALSE(report.failed()) << report.error->text;
+    EXPECT_EQ(report.value.damage, "");
+    EXPECT_TRUE(report.value.lost.empty()) << textOf(report.value.lost);
+    EXPECT_EQ(report.value.whole + countOf(report.value.notedLost), 3001);
+    EXPECT_TRUE(log_.contains(std::to_string(countOf(report.value.notedLost)) + " are lost ("));
   }
 };
 
@@ -54,20 +78,20 @@ TEST_F(RecorderFileTest, AnEmptyFileIsUsed) {
   EXPECT_EQ(askOne(file(), "SELECT name FROM events"), "fresh");
 }
 
-TEST_F(RecorderFileTest, ADatabaseDamagedInTheMiddleIsSetAside) {
+TEST_F(RecorderFileTest, OfADatabaseDamagedInTheMiddleTheRestIsCarriedOver) {
   start();
   recordMany(3000, 100);
   stop();
   overwrite(file(), static_cast<std::streamoff>(std::filesystem::file_size(file()) / 2), 20'000);
-  expectSetAside();
+  expectTheRestCarriedOver();
 }
 
-TEST_F(RecorderFileTest, ATruncatedDatabaseIsSetAside) {
+TEST_F(RecorderFileTest, OfATruncatedDatabaseTheRestIsCarriedOver) {
   start();
   recordMany(3000, 100);
   stop();
   std::filesystem::resize_file(file(), std::filesystem::file_size(file()) / 2);
-  expectSetAside();
+  expectTheRestCarriedOver();
 }
 
 TEST_F(RecorderFileTest, LogAndIndexGoWithTheFile) {
@@ -138,7 +162,7 @@ TEST_F(RecorderFileTest, FilesSetAsideInTheSameSecondGetDifferentNames) {
 }
 
 TEST_F(RecorderFileTest, DamageFoundWhileRunningMovesOnToAFreshFile) {
-  options_.maxMegabytes = 20;
+  options_.maxMegabytes = 26;
   start();
   for (int round = 0; round < 16; ++round) {
     recordMany(1000, 1000);
@@ -154,9 +178,14 @@ TEST_F(RecorderFileTest, DamageFoundWhileRunningMovesOnToAFreshFile) {
   stop();
   EXPECT_EQ(counters.committed, 26'000U);
   EXPECT_EQ(errors(), 1U);
-  ASSERT_EQ(filesSetAside().size(), 1U);
+  EXPECT_TRUE(log_.contains(platform::LogLevel::Error, "it is set aside as recorder.sqlite3.damaged-"));
+  EXPECT_TRUE(log_.contains("its kind is over its share")) << "the cap has no room for both";
   EXPECT_EQ(askOne(file(), "PRAGMA integrity_check"), "ok");
-  EXPECT_EQ(askOne(file(), "SELECT max(id), max(id) - min(id) + 1 - count(*) FROM events"), "26000|0");
+  EXPECT_EQ(askOne(file(), "SELECT max(id) FROM events"), "26000");
+  const auto report = inspectStore(file());
+  ASSERT_FALSE(report.failed()) << report.error->text;
+  EXPECT_TRUE(report.value.lost.empty()) << textOf(report.value.lost);
+  EXPECT_TRUE(log_.contains(" are lost (")) << "the note goes with the oldest events, the line stays";
 }
 
 TEST_F(RecorderFileTest, ADroppedTableMovesOnToAFreshFile) {
@@ -183,6 +212,27 @@ TEST_F(RecorderFileTest, ARenamedFileKeepsItsEventsAndAFreshOneIsBegun) {
   EXPECT_EQ(ask(file(), "SELECT id, name FROM events"), std::vector<std::string>{"6|after"});
   EXPECT_EQ(askOne(elsewhere, "SELECT count(*) FROM events"), "5");
   EXPECT_EQ(askOne(elsewhere, "PRAGMA integrity_check"), "ok");
+}
+
+TEST_F(RecorderFileTest, AStatusThatCanNotBeReadIsNoFileTakenAway) {
+  // A folder that one of the path's names can't be: the file is still where it was. The two change places in one step,
+  // so that nobody sees neither.
+  const auto swap = [](const std::filesystem::path& one, const std::filesystem::path& other) {
+    ASSERT_EQ(::renameat2(AT_FDCWD, one.c_str(), AT_FDCWD, other.c_str(), RENAME_EXCHANGE), 0) << errno;
+  };
+  const std::filesystem::path folder = directory_.path() / "state";
+  options_.file = folder / "recorder.sqlite3";
+  start();
+  record("before");
+  ASSERT_TRUE(flush());
+  std::ofstream(directory_.path() / "elsewhere") << "in the way";
+  swap(folder, directory_.path() / "elsewhere");
+  record("after");
+  ASSERT_TRUE(eventually([&] { return errors() == 1; }));
+  EXPECT_FALSE(log_.contains("taken away"));
+  swap(folder, directory_.path() / "elsewhere");
+  ASSERT_TRUE(flush());
+  EXPECT_EQ(ask(file(), "SELECT id, name FROM events"), (std::vector<std::string>{"1|before", "2|after"}));
 }
 
 TEST_F(RecorderFileTest, ADeletedDirectoryIsMadeAnew) {

@@ -104,6 +104,11 @@ class RecorderFixture : public ::testing::Test {
 
   const std::filesystem::path& file() const { return options_.file; }
 
+  // No group is written for its age, and none is too old to wait.
+  void gatherForLong() {
+    options_.quietTime = options_.groupTime = options_.busyGroupTime = options_.oldestWaiting =
+        std::chrono::seconds(30);
+  }
   // A started recorder on the options as they are.
   Recorder& start() {
     recorder_ = std::make_unique<Recorder>(options_, log_, clock_);

@@ -66,14 +66,85 @@ TEST_F(RecorderRetention, EventsThatGrewTooOldGoWhileItRuns) {
   EXPECT_EQ(askOne(file(), "SELECT count(*), min(id) FROM events"), "10|1001");
 }
 
-TEST_F(RecorderRetention, AgeCountsFromTheEventsTimeToTheSecond) {
+TEST_F(RecorderRetention, AgeCountsFromTheCommitToTheSecond) {
   options_.maxAgeDays = 1;
-  clock_.setEpochSeconds(100 * kDay);
+  options_.maintenanceInterval = std::chrono::milliseconds(5);
   start();
-  recorder_->record("tally", "older", {}, {}, 99 * kDay - 1);
-  recorder_->record("tally", "justInTime", {}, {}, 99 * kDay);
+  record("first");
   ASSERT_TRUE(flush());
-  EXPECT_EQ(ask(file(), "SELECT name FROM events"), std::vector<std::string>{"justInTime"});
+  clock_.advance(std::chrono::hours(24));
+  record("second");
+  ASSERT_TRUE(flush());
+  EXPECT_EQ(recorder_->counters().expired, 0U);
+  clock_.advance(std::chrono::seconds(1));
+  EXPECT_TRUE(eventually([&] { return recorder_->counters().expired == 1; }));
+  EXPECT_EQ(ask(file(), "SELECT name FROM events"), std::vector<std::string>{"second"});
+}
+
+TEST_F(RecorderRetention, AnEventsOwnTimeDoesNotMakeItOld) {
+  start();
+  recorder_->record("tally", "of1970", {}, {}, 0);
+  record("ofToday");
+  ASSERT_TRUE(flush());
+  stop();
+  start();
+  record("next");
+  ASSERT_TRUE(flush());
+  EXPECT_EQ(askOne(file(), "SELECT count(*) FROM events"), "3");
+}
+
+// What a step of the wall clock does to a file of three runs: nothing.
+class RecorderClockStep : public RecorderFixture, public ::testing::WithParamInterface<double> {};
+
+TEST_P(RecorderClockStep, DeletesNothing) {
+  options_.maintenanceInterval = std::chrono::milliseconds(1);
+  start();
+  recordMany(100);
+  ASSERT_TRUE(flush());
+  clock_.setEpochSeconds(clock_.epochSeconds() + GetParam());
+  recordMany(100);
+  ASSERT_TRUE(flush());
+  stop();
+  clock_.setEpochSeconds(clock_.epochSeconds() + GetParam());
+  start();
+  recordMany(100);
+  ASSERT_TRUE(flush());
+  stop();
+  // A new boot, whose wall clock has stepped once more.
+  options_.boot = "another";
+  clock_.setEpochSeconds(clock_.epochSeconds() + GetParam());
+  clock_.setMonotonic(std::chrono::seconds(5));
+  clock_.setSystemUptimeSeconds(5);
+  start();
+  recordMany(100);
+  ASSERT_TRUE(flush());
+  EXPECT_EQ(recorder_->counters().expired, 0U);
+  EXPECT_EQ(askOne(file(), "SELECT count(*), max(id) FROM events"), "400|400");
+}
+
+INSTANTIATE_TEST_SUITE_P(Steps, RecorderClockStep,
+                         ::testing::Values(kDay, 365 * kDay, -kDay, -365 * kDay, -1'750'000'000.0));
+
+TEST_F(RecorderRetention, AgeGoesOnAcrossBootsByWhatIsKnownToHavePassed) {
+  options_.boot = "one";
+  options_.maxAgeDays = 10;
+  start();
+  recordMany(100);
+  ASSERT_TRUE(flush());
+  clock_.advance(std::chrono::hours(24 * 6));
+  record("later");
+  stop();
+  options_.boot = "two";
+  clock_.setMonotonic(std::chrono::hours(24 * 3));
+  clock_.setSystemUptimeSeconds(3 * kDay);
+  start();
+  record("soon");
+  ASSERT_TRUE(flush());
+  EXPECT_EQ(recorder_->counters().expired, 0U) << "nine days have passed";
+  clock_.advance(std::chrono::hours(24 * 2));
+  record("late");
+  ASSERT_TRUE(flush());
+  EXPECT_EQ(recorder_->counters().expired, 100U);
 }
 
 TEST_F(RecorderRetention, OldEventsOfEarlierRunsGoAtTheStart) {

@@ -2,7 +2,9 @@
 
 #include <cmath>
 #include <limits>
+#include <utility>
 
+#include "testing/ManualWorkQueues.h"
 #include "tests/recorder/RecorderFixture.h"
 
 namespace tarn::recorder {
@@ -119,7 +121,7 @@ TEST_F(RecorderTest, AGroupIsNotHeldBackByEventsThatKeepComing) {
 }
 
 TEST_F(RecorderTest, EventsCloseTogetherShareACommit) {
-  options_.quietTime = options_.groupTime = std::chrono::seconds(30);
+  gatherForLong();
   start().waitUntilOpened();
   recordMany(100);
   EXPECT_EQ(recorder_->counters().waiting, 100U);
@@ -130,7 +132,7 @@ TEST_F(RecorderTest, EventsCloseTogetherShareACommit) {
 }
 
 TEST_F(RecorderTest, ALargeGroupIsWrittenAtOnce) {
-  options_.quietTime = options_.groupTime = std::chrono::seconds(30);
+  gatherForLong();
   options_.groupEvents = 50;
   start().waitUntilOpened();
   recordMany(50);
@@ -138,15 +140,84 @@ TEST_F(RecorderTest, ALargeGroupIsWrittenAtOnce) {
 }
 
 TEST_F(RecorderTest, AGroupOfManyBytesIsWrittenAtOnce) {
-  options_.quietTime = options_.groupTime = std::chrono::seconds(30);
+  gatherForLong();
   options_.groupBytes = 100'000;
   start().waitUntilOpened();
   recordMany(11, 10'000);
   EXPECT_TRUE(eventually([&] { return recorder_->counters().committed >= 10; }));
 }
 
+class RecorderSettle : public RecorderFixture {
+ protected:
+  void settle(const std::string& name) {
+    recorder_->settle(queue_, [this, name, guard = Guard(this)] { answers_.push_back(name); });
+  }
+  // Counts the answers that are destroyed, called or not.
+  struct Guard {
+    explicit Guard(RecorderSettle* settling) : test(settling) {}
+    Guard(Guard&& other) noexcept : test(std::exchange(other.test, nullptr)) {}
+    Guard& operator=(Guard&&) = delete;
+    ~Guard() {
+      if (test != nullptr) {
+        ++test->destroyed_;
+      }
+    }
+    RecorderSettle* test;
+  };
+
+  tarn::testing::ManualWorkQueues queues_{clock_};
+  const std::shared_ptr<platform::WorkQueue> queue_ =
+      queues_.makeSerialQueue("settled", platform::QualityOfService::Utility);
+  std::vector<std::string> answers_;
+  std::atomic<int> destroyed_{0};
+};
+
+TEST_F(RecorderSettle, AnswersOnItsQueueOnceAllHandedOverBeforeIsCommitted) {
+  recorder_ = std::make_unique<Recorder>(options_, log_, clock_);
+  recordMany(10);
+  settle("ten");
+  recordMany(10);
+  settle("twenty");
+  EXPECT_EQ(queues_.runUntilIdle(), 0U);
+  recorder_->start();
+  EXPECT_TRUE(eventually([&] { return queue_->waiting() == 2; }));
+  EXPECT_TRUE(answers_.empty());
+  queues_.runUntilIdle();
+  EXPECT_EQ(answers_, (std::vector<std::string>{"ten", "twenty"}));
+  EXPECT_EQ(askOne(file(), "SELECT count(*) FROM events"), "20");
+}
+
+TEST_F(RecorderSettle, AnswersAtOnceWhenNothingWaits) {
+  recorder_ = std::make_unique<Recorder>(options_, log_, clock_);
+  settle("nothing");
+  queues_.runUntilIdle();
+  EXPECT_EQ(answers_, std::vector<std::string>{"nothing"});
+}
+
+TEST_F(RecorderSettle, DoesNotWaitForCompany) {
+  gatherForLong();
+  start().waitUntilOpened();
+  record("alone");
+  settle("alone");
+  EXPECT_TRUE(eventually([&] { return queue_->waiting() == 1; }));
+}
+
+TEST_F(RecorderSettle, IsDestroyedUncalledWhenEventsAreGivenUp) {
+  std::filesystem::create_directory(directory_.path() / "state");
+  std::ofstream(directory_.path() / "state" / "file") << "in the way";
+  options_.file = directory_.path() / "state" / "file" / "recorder.sqlite3";
+  start();
+  record("lost");
+  settle("lost");
+  recorder_->shutdown();
+  settle("later");
+  queues_.runUntilIdle();
+  EXPECT_TRUE(answers_.empty());
+  EXPECT_EQ(destroyed_, 2);
+}
+
 TEST_F(RecorderTest, ShutdownCommitsWhatWaits) {
-  options_.quietTime = options_.groupTime = std::chrono::seconds(30);
+  gatherForLong();
   start();
   recordMany(500);
   recorder_->shutdown();
@@ -176,7 +247,7 @@ TEST_F(RecorderTest, IdsGoOnInTheNextRun) {
 }
 
 TEST_F(RecorderTest, IsFullFromTheHighMarkUntilTheLowMark) {
-  options_.quietTime = options_.groupTime = std::chrono::seconds(30);
+  gatherForLong();
   options_.highWaterEvents = 10;
   options_.lowWaterEvents = 5;
   recorder_ = std::make_unique<Recorder>(options_, log_, clock_);
@@ -198,7 +269,7 @@ TEST_F(RecorderTest, IsFullFromTheHighMarkUntilTheLowMark) {
 }
 
 TEST_F(RecorderTest, BytesFillItToo) {
-  options_.quietTime = options_.groupTime = std::chrono::seconds(30);
+  gatherForLong();
   options_.highWaterBytes = 100'000;
   options_.lowWaterBytes = 50'000;
   start();

@@ -45,6 +45,41 @@ TEST_F(TarnReportingServiceTest, AcceptsAConnectionAndListsItsClient) {
   EXPECT_TRUE(platform_.log.contains(LogLevel::Debug, "new client with pid 41"));
 }
 
+TEST_F(TarnReportingServiceTest, ClientThatEndsWithTheServiceStopsItsSessionsForThatReason) {
+  const Client client = connect(41);
+  Answer<bool> held;
+  create(client, 10);
+  start(client, 10, held);
+  const auto session = sessionOf(0, 10);
+  EXPECT_EQ(service_->clientEnd(), TarnReportingClientEnd::ClientGone);
+  service_->announceEnd();
+  EXPECT_EQ(service_->clientEnd(), TarnReportingClientEnd::ServiceStopping);
+  client.connection->invalidate();
+  platform_.runUntilIdle();
+  EXPECT_FALSE(session->started());
+  EXPECT_TRUE(service_->getAllClients().empty());
+  EXPECT_TRUE(platform_.log.contains(LogLevel::Default, "ending client 41. reason=service-stopping"));
+}
+
+TEST_F(TarnReportingServiceTest, ClientThatGoesGivesNoReason) {
+  const Client client = connect(41);
+  client.connection->invalidate();
+  platform_.runUntilIdle();
+  EXPECT_EQ(platform_.log.count("reason="), 0U);
+  EXPECT_EQ(TarnReportingClientEndName(TarnReportingClientEnd::ClientGone), "client-gone");
+}
+
+TEST_F(TarnReportingServiceTest, SingleMessageSessionEndsWithTheServiceAndItsLaterCheckFindsNothing) {
+  const Client client = connect(41);
+  EXPECT_FALSE(send(client, {{"a", 1}}, std::nullopt));
+  EXPECT_EQ(service_->sessionCount(), 1U);
+  service_->endSingleMessageSession();
+  EXPECT_EQ(service_->sessionCount(), 0U);
+  service_->endSingleMessageSession();
+  platform_.workQueues.advance(10s);
+  EXPECT_EQ(platform_.log.count("Stopping singleMessageSession"), 0U);
+}
+
 TEST_F(TarnReportingServiceTest, MessageWithoutIDsReachesTheRunningSessionsOfAllClients) {
   const Client one = connect(41);
   const Client other = connect(42);

@@ -48,7 +48,7 @@ TEST(EventText, LineKeepsNamesThatAreLongerThanTheirColumn) {
 TEST(EventText, LineShowsWhatATerminalWouldObey) {
   recorder::EventRow event = row();
   event.name = "a\x1b[2J";
-  EXPECT_NE(eventLine(event).find("a\\x1b[2J"), std::string::npos);
+  EXPECT_NE(eventLine(event).find("a\\u001b[2J"), std::string::npos);
 }
 
 TEST(Output, PrintableLeavesTextAboveAsciiAlone) {

@@ -158,6 +158,13 @@ TEST(ScriptParser, RefusesValuesOfAnotherKind) {
   faultOf(R"({"op":17})");
 }
 
+TEST(ScriptParser, ShowsAWrongValueAsItIsWritten) {
+  EXPECT_TRUE(contains(faultOf("[]"), "the line is [], expected"));
+  EXPECT_TRUE(contains(faultOf(R"({"op":"reporterID","reporterID":true})"), "is true, expected"));
+  EXPECT_TRUE(contains(faultOf(R"({"op":"reporterID","reporterID":{"a":[1,"b"]}})"), R"(is {"a":[1,"b"]}, expected)"));
+  EXPECT_TRUE(contains(faultOf(R"({"op":"reporterID","reporterID":"1"})"), R"(is "1", expected)"));
+}
+
 TEST(ScriptParser, NamesTheMemberThatIsMissing) {
   EXPECT_TRUE(contains(faultOf(R"({"op":"sendMessage","category":1,"type":0})"), "lacks the member \"message\""));
   EXPECT_TRUE(contains(faultOf(R"({"op":"setServiceType","serviceType":1})"), "lacks the member \"reporterID\""));

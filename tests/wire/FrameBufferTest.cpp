@@ -134,7 +134,7 @@ TEST(FrameBuffer, MemoryStaysWithinTheLargestFrameAndAGulpAndShrinksBack) {
 
 // A buffer whose memory is told in gulps. What it is fed must be made before it.
 struct WatchedBuffer {
-  const HeapGrowth heap;
+  const HeapGrowth heap{};
   FrameBuffer buffer;
 
   std::ptrdiff_t gulps() const { return (heap.bytes() + kGulp / 2) / kGulp; }

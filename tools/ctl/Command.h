@@ -7,6 +7,8 @@
 #include <functional>
 #include <string>
 
+#include "tools/ctl/ServiceConnection.h"
+
 namespace CLI {
 class App;
 }
@@ -14,7 +16,7 @@ class App;
 namespace tarn::ctl {
 
 struct Context {
-  std::string socket;          // of the service
+  ServiceAddress socket;       // of the service
   std::string stateDirectory;  // of the service
   std::function<int()> chosen;
 };
@@ -29,5 +31,6 @@ void addKillCommand(CLI::App& app, Context& context);
 void addStatusCommand(CLI::App& app, Context& context);
 void addLintCommand(CLI::App& app, Context& context);
 void addExplainCommand(CLI::App& app, Context& context);
+void addCheckCommand(CLI::App& app, Context& context);
 
 }  // namespace tarn::ctl

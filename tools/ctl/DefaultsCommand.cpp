@@ -1,6 +1,7 @@
 #include <unistd.h>
 
 #include <CLI/CLI.hpp>
+#include <algorithm>
 #include <memory>
 
 #include "host/settings/JsonDefaultsStore.h"
@@ -46,7 +47,11 @@ int print(const plist::ValueView& value, JsonLayout layout) {
     text->pop_back();
   }
   Output output(STDOUT_FILENO);
-  output.line(*text);
+  for (std::string_view rest = *text; !rest.empty();) {
+    const std::size_t end = std::min(rest.find('\n'), rest.size());
+    output.line(rest.substr(0, end));
+    rest.remove_prefix(std::min(end + 1, rest.size()));
+  }
   return output.status();
 }
 
@@ -55,13 +60,13 @@ int read(const Context& context, const Arguments& arguments) {
   Defaults defaults(context);
   const JsonDefaultsStore::Suite suite = defaults->suite(arguments.suite);
   if (suite.failed()) {
-    complain(printable(suite.error->text));
+    complain(suite.error->text);
     return kBadInput;
   }
   if (arguments.wholeSuite) return print(suite.value, JsonLayout::Indented);
   const plist::ValueView value = suite.value.get(arguments.key);
   if (!value.present()) {
-    complain("there is no key \"" + printable(arguments.key) + "\" in " + printable(arguments.suite));
+    complain("there is no key \"" + arguments.key + "\" in " + arguments.suite);
     return kFailure;
   }
   return print(value, JsonLayout::OneLine);
@@ -74,7 +79,7 @@ int store(const Context& context, const Arguments& arguments, const plist::Value
   const bool isBroken = defaults->suite(arguments.suite).failed();
   const Status stored = defaults->store(arguments.suite, arguments.key, value);
   if (stored.ok()) return kSuccess;
-  complain(printable(stored->text));
+  complain(stored->text);
   return isBroken ? kBadInput : kFailure;
 }
 

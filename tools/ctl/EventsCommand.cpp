@@ -24,6 +24,7 @@ struct Arguments {
   std::string nameGlob;
   bool follow = false;
   bool asJson = false;
+  bool settled = false;
 };
 
 volatile std::sig_atomic_t stopRequested = 0;
@@ -73,7 +74,7 @@ int EventPrinter::print() {
   after_ = arguments_.query.after;
   if (!printNew()) return kFailure;
   if (isMissing_ && !arguments_.follow) {
-    complain("there are no events: " + printable(path_) + " is not there");
+    complain("there are no events: " + path_ + " is not there");
     return kFailure;
   }
   while (arguments_.follow && stopRequested == 0 && output_.good() && outputIsWanted()) {
@@ -89,7 +90,7 @@ bool EventPrinter::printNew() {
     query.after = after_;
     result = reader_.read(query);
     if (result.status == EventReader::Status::Failed) {
-      complain("can't read " + printable(path_) + ": " + printable(result.error));
+      complain("can't read " + result.error);
       return false;
     }
     isMissing_ = result.status == EventReader::Status::Missing;
@@ -122,6 +123,9 @@ int events(const Context& context, Arguments& arguments, bool hasBackend, bool h
   if (hasName) {
     arguments.query.nameGlob = arguments.nameGlob;
   }
+  if (arguments.settled) {
+    if (const int status = settleService(context.socket); status != kSuccess) return status;
+  }
   if (arguments.follow) {
     stopOnSignals();
   }
@@ -140,8 +144,10 @@ void addEventsCommand(CLI::App& app, Context& context) {
       ->type_name("GLOB");
   command->add_option("--after", arguments->query.after, "Only events with greater ids")->type_name("ID");
   command->add_flag("--json", arguments->asJson, "Print one object a line: id, time, backend, name, payload, detail");
+  command->add_flag("--settled", arguments->settled,
+                    "First wait until nothing waits for the service's queue or the disk any more");
   command->footer(
-      "\nReads the recorder in the state directory; the service need not run.\n\n"
+      "\nReads the recorder in the state directory; the service need not run. --settled asks it when it does.\n\n"
       "Examples:\n"
       "  tarnreportingctl events --name '*.Summary'\n"
       "  tarnreportingctl events --follow --json | jq .payload.audiotag");

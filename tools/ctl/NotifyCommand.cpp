@@ -36,7 +36,7 @@ int notify(const Context& context, const Arguments& arguments) {
   const linux_host::NotificationFolder notifications(context.stateDirectory + "/notifications");
   const Status posted = notifications.post(arguments.name, stateWord(arguments.state));
   if (posted.ok()) return kSuccess;
-  complain(printable(posted->text));
+  complain(posted->text);
   return kFailure;
 }
 

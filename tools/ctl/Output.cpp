@@ -4,14 +4,15 @@
 #include <cstdio>
 
 #include "host/system/Files.h"
-#include "plist/Hex.h"
+#include "plist/EscapedText.h"
 #include "tools/ctl/ExitStatus.h"
 
 namespace tarn::ctl {
 
 bool Output::line(std::string_view text) {
   if (!good()) return false;
-  buffer_.assign(text);
+  buffer_.clear();
+  plist::appendPrintable(buffer_, text, plist::LineEnds::Escaped);
   buffer_ += '\n';
   failure_ = linux_host::writeAll(fd_, buffer_);
   return good();
@@ -24,7 +25,7 @@ int Output::status() const {
 }
 
 void complain(std::string_view text) {
-  const std::string line = "tarnreportingctl: " + std::string(text) + "\n";
+  const std::string line = "tarnreportingctl: " + printable(text) + "\n";
   std::fwrite(line.data(), 1, line.size(), stderr);
 }
 
@@ -37,16 +38,7 @@ bool isNamed(const std::string& path, std::string_view option) {
 
 std::string printable(std::string_view text) {
   std::string shown;
-  shown.reserve(text.size());
-  for (const char character : text) {
-    const auto byte = static_cast<unsigned char>(character);
-    if (byte >= 0x20 && byte != 0x7F) {
-      shown += character;
-    } else {
-      shown += "\\x";
-      plist::appendHex(shown, character);
-    }
-  }
+  plist::appendPrintable(shown, text, plist::LineEnds::Escaped);
   return shown;
 }
 

@@ -18,7 +18,8 @@ class Output {
   Output(const Output&) = delete;
   Output& operator=(const Output&) = delete;
 
-  // Writes one line now; its line end is added. False once anything could not be written.
+  // Writes one line now, printable() as a whole, which changes nothing of what a line of JSON says; its line end is
+  // added. False once anything could not be written.
   bool line(std::string_view text);
 
   bool good() const noexcept { return failure_.ok(); }
@@ -32,13 +33,14 @@ class Output {
   Status failure_;
 };
 
-// Writes "tarnreportingctl: TEXT" to stderr.
+// Writes "tarnreportingctl: TEXT" to stderr, printable().
 void complain(std::string_view text);
 
 // Whether a place is named, by an option or by the environment; complains when not.
 bool isNamed(const std::string& path, std::string_view option);
 
-// The text with what a terminal would obey (control characters) shown as \xNN.
+// The text with what a terminal would obey shown as a backslash, u and four hexadecimal digits; see
+// plist::appendPrintable.
 std::string printable(std::string_view text);
 
 }  // namespace tarn::ctl

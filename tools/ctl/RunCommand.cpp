@@ -57,7 +57,7 @@ constexpr const char* kHelpAfter = R"(
 
 Each line waits for its reply, except a start (its reply comes at the stop) and killService (it has none). Replies are
 printed as they arrive, one JSON object a line: client, line, op, error, result. A reply that carries an error is a
-reply like any other. A bad line stops the script: FILE:LINE, what is wrong and what was expected, exit 65.
+reply like any other; one that doesn't come within --timeout stops the script with 69. A bad line stops the script: FILE:LINE, what is wrong and what was expected, exit 65.
 
 Example:
   tarnreportingctl run <<'END'
@@ -69,10 +69,9 @@ Example:
   END)";
 
 int run(const Context& context, const std::string& path) {
-  if (!isNamed(context.socket, "--socket")) return kWrongUsage;
   const InputFile file(path);
   if (file.fd() < 0) {
-    complain(linux_host::errorOf("can't open the script " + printable(path), errno).text);
+    complain(linux_host::errorOf("can't open the script " + path, errno).text);
     return kBadInput;
   }
   Output output(STDOUT_FILENO);

@@ -19,7 +19,6 @@ namespace tarn::ctl {
 
 namespace {
 
-using client::ClientConnection;
 using client::Outcome;
 using client::Reply;
 using script::ScriptLines;
@@ -77,8 +76,8 @@ int pollTimeout(std::optional<std::chrono::steady_clock::time_point> deadline) {
 
 }  // namespace
 
-ScriptPlayer::ScriptPlayer(std::string socketPath, std::string scriptName, Output& output)
-    : socketPath_(std::move(socketPath)), scriptName_(std::move(scriptName)), output_(output) {}
+ScriptPlayer::ScriptPlayer(ServiceAddress address, std::string scriptName, Output& output)
+    : address_(std::move(address)), scriptName_(std::move(scriptName)), output_(output) {}
 
 int ScriptPlayer::play(int fd) {
   if (playLines(fd)) {
@@ -166,9 +165,14 @@ bool ScriptPlayer::playRequest(const ScriptStep& step) {
 }
 
 bool ScriptPlayer::waitForReply(const std::string& name, Connection& connection, const bool& done) {
+  const auto deadline = Clock::now() + address_.timeout;
   while (!done) {
     if (!connection.client->connected()) return stopForLoss(name, connection);
-    if (!pump(std::nullopt)) return false;
+    if (Clock::now() >= deadline) {
+      return stop(kUnreachable, "the service at " + address_.sockets.front() + " does not answer within " +
+                                    secondsText(address_.timeout));
+    }
+    if (!pump(deadline)) return false;
   }
   // The service serves a connection's requests in order, so what was sent before was served before.
   connection.startIsUnserved = false;
@@ -228,13 +232,14 @@ ScriptPlayer::Connection* ScriptPlayer::connect(const std::string& name) {
     }
     return &found->second;
   }
-  auto connected = ClientConnection::connect(socketPath_, connectionOptions());
-  if (connected.failed()) {
-    stop(kUnreachable, "the service can't be reached: " + connected.error->text);
+  Reached reached = reachService(address_, connectionOptions());
+  if (!reached.client) {
+    stop(kUnreachable, reached.complaint);
     return nullptr;
   }
+  address_.sockets = {reached.socket};
   Connection& connection = connections_[name];
-  connection.client = std::move(connected.value);
+  connection.client = std::move(reached.client);
   connection.client->setLostHandler([&connection](const std::string& why) { connection.lossReason = why; });
   return &connection;
 }
@@ -292,13 +297,13 @@ void ScriptPlayer::printReply(const ScriptStep& step, const Reply& reply) {
 }
 
 bool ScriptPlayer::stopForLoss(const std::string& name, const Connection& connection) {
-  return stop(kUnreachable, "the connection \"" + name + "\" to " + socketPath_ + " was lost: " +
+  return stop(kUnreachable, "the connection \"" + name + "\" to " + address_.sockets.front() + " was lost: " +
                                 (serviceWasKilled_ ? "the script ended the service" : connection.lossReason));
 }
 
 bool ScriptPlayer::stop(int status, const std::string& why) {
   status_ = status;
-  std::cerr << scriptName_ << ':' << line_ << ": " << printable(why) << '\n';
+  std::cerr << printable(scriptName_) << ':' << line_ << ": " << printable(why) << '\n';
   return false;
 }
 

@@ -19,6 +19,7 @@
 
 #include "client/ClientConnection.h"
 #include "tools/ctl/Output.h"
+#include "tools/ctl/ServiceConnection.h"
 #include "tools/script/ScriptLines.h"
 #include "tools/script/ScriptStep.h"
 
@@ -27,7 +28,7 @@ namespace tarn::ctl {
 class ScriptPlayer {
  public:
   // `scriptName` is the script's name in complaints.
-  ScriptPlayer(std::string socketPath, std::string scriptName, Output& output);
+  ScriptPlayer(ServiceAddress address, std::string scriptName, Output& output);
   ScriptPlayer(const ScriptPlayer&) = delete;
   ScriptPlayer& operator=(const ScriptPlayer&) = delete;
 
@@ -65,7 +66,7 @@ class ScriptPlayer {
   bool stopForLoss(const std::string& name, const Connection& connection);
   bool stop(int status, const std::string& why);
 
-  const std::string socketPath_;
+  ServiceAddress address_;  // the one place alone, once the service was reached
   const std::string scriptName_;
   Output& output_;
   std::map<std::string, Connection> connections_;

@@ -1,39 +1,143 @@
 #include "tools/ctl/ServiceConnection.h"
 
+#include <algorithm>
+#include <cerrno>
+#include <system_error>
+#include <thread>
+
+#include "plist/ValueView.h"
 #include "tools/ctl/ExitStatus.h"
 #include "tools/ctl/Output.h"
 
 namespace tarn::ctl {
 
-Answer askService(const std::string& socketPath, const client::Request& request) {
-  // As long as the longest wait of a worker that blocks the service, and some more.
-  constexpr std::chrono::minutes kPatience{4};
-  Answer answer;
-  if (!isNamed(socketPath, "--socket")) {
-    answer.status = kWrongUsage;
-    return answer;
+namespace {
+
+using Clock = std::chrono::steady_clock;
+using client::Outcome;
+using client::Reply;
+using std::chrono::milliseconds;
+
+// Between two looks at a service that is not there yet, or not at rest.
+constexpr milliseconds kPause{20};
+
+milliseconds left(Clock::time_point deadline) {
+  return std::max(milliseconds(0), std::chrono::ceil<milliseconds>(deadline - Clock::now()));
+}
+
+bool nobodyListens(std::int64_t errorNumber) {
+  return errorNumber == ENOENT || errorNumber == ECONNREFUSED || errorNumber == ENOTDIR;
+}
+
+std::string silence(const std::string& socket, milliseconds timeout) {
+  return "the service at " + socket + " does not answer within " + secondsText(timeout);
+}
+
+// Whether nothing waits, by the service's own word.
+bool isAtRest(const plist::Dictionary& status) {
+  return status.get("queued").asInt64() == 0 && status.get("recorder_waiting").asInt64() == 0;
+}
+
+}  // namespace
+
+std::string secondsText(milliseconds time) {
+  return plist::ValueView(std::chrono::duration<double>(time).count()).asText() + " s";
+}
+
+Reached reachService(const ServiceAddress& address, const client::Options& options) {
+  Reached reached;
+  std::string tried;
+  for (const std::string& socket : address.sockets) {
+    auto connected = client::ClientConnection::connect(socket, options);
+    if (connected.ok()) {
+      reached.client = std::move(connected.value);
+      reached.socket = socket;
+      return reached;
+    }
+    const std::int64_t code = connected.error.code();
+    if (code == EACCES || code == EPERM) {
+      reached.complaint = "the service can't be reached: " + socket +
+                          " refuses this user: " + std::generic_category().message(static_cast<int>(code));
+      return reached;
+    }
+    tried += (tried.empty() ? "" : "; ") + connected.error->text;
+    if (!nobodyListens(code)) break;
   }
-  const auto connected = client::ClientConnection::connect(socketPath);
-  if (connected.failed()) {
-    complain("the service can't be reached: " + connected.error->text);
+  reached.complaint = "the service can't be reached: " + tried;
+  return reached;
+}
+
+int waitForService(const ServiceAddress& address, milliseconds longest) {
+  const auto deadline = Clock::now() + longest;
+  for (;;) {
+    const Reached reached = reachService(address);
+    if (reached.client) {
+      // One that is just starting may be reached before it serves.
+      const Reply reply = reached.client->call(client::status(), left(deadline));
+      if (reply.ok()) return kSuccess;
+      if (reply.outcome == Outcome::TimedOut) {
+        complain(silence(reached.socket, longest));
+        return kUnreachable;
+      }
+    }
+    if (Clock::now() >= deadline) {
+      complain((reached.client ? "the service at " + reached.socket + " ended" : reached.complaint) + " (waited " +
+               secondsText(longest) + ")");
+      return kUnreachable;
+    }
+    std::this_thread::sleep_for(std::min(kPause, left(deadline)));
+  }
+}
+
+Answer askService(const ServiceAddress& address, const client::Request& request) {
+  Answer answer;
+  const Reached reached = reachService(address);
+  if (!reached.client) {
+    complain(reached.complaint);
     answer.status = kUnreachable;
     return answer;
   }
-  answer.reply = connected.value->call(request, kPatience);
+  answer.socket = reached.socket;
+  answer.reply = reached.client->call(request, address.timeout);
   switch (answer.reply.outcome) {
-    case client::Outcome::Ok:
+    case Outcome::Ok:
       break;
-    case client::Outcome::Error:
-      complain("the service answered with an error: " + printable(answer.reply.error.domain) + " " +
-               std::to_string(answer.reply.error.code) + " " + printable(answer.reply.error.text));
+    case Outcome::Error:
+      complain("the service answered with an error: " + answer.reply.error.domain + " " +
+               std::to_string(answer.reply.error.code) + " " + answer.reply.error.text);
       answer.status = kFailure;
       break;
+    case Outcome::TimedOut:
+      complain(silence(reached.socket, address.timeout));
+      answer.status = kUnreachable;
+      break;
     default:
-      complain("no answer from the service at " + socketPath + ": " + answer.reply.error.text);
+      complain("no answer from the service at " + reached.socket + ": " + answer.reply.error.text);
       answer.status = kUnreachable;
       break;
   }
   return answer;
+}
+
+int settleService(const ServiceAddress& address) {
+  const auto deadline = Clock::now() + address.timeout;
+  const Reached reached = reachService(address);
+  if (!reached.client) return kSuccess;
+  for (;;) {
+    const Reply reply = reached.client->call(client::status(), left(deadline));
+    if (reply.ok() && isAtRest(reply.dictionary())) return kSuccess;
+    if (!reply.ok() && reply.outcome != Outcome::TimedOut) {
+      complain("no answer from the service at " + reached.socket + ": " + reply.error.text);
+      return kUnreachable;
+    }
+    if (Clock::now() >= deadline) {
+      complain(reply.ok()
+                   ? "the service at " + reached.socket + " is not at rest within " + secondsText(address.timeout)
+                   : silence(reached.socket, address.timeout));
+      return kUnreachable;
+    }
+    std::this_thread::sleep_for(std::min(kPause, left(deadline)));
+  }
 }
 
 }  // namespace tarn::ctl

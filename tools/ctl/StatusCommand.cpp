@@ -50,7 +50,7 @@ int status(const Context& context, bool asJson) {
     plist::appendJson(text, dictionary);
     output.line(text);
   } else {
-    printStatus(output, context.socket, dictionary);
+    printStatus(output, answer.socket, dictionary);
   }
   return output.status();
 }

@@ -1,10 +1,13 @@
 // tarnreportingctl: talks to the reporting service and reads what it recorded.
 #include <CLI/CLI.hpp>
+#include <algorithm>
+#include <chrono>
 #include <csignal>
 #include <exception>
 #include <iostream>
 #include <optional>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "host/settings/HostPaths.h"
@@ -16,6 +19,16 @@ namespace tarn::ctl {
 
 namespace {
 
+constexpr double kLongestSeconds = 86400;
+constexpr const char* kUsualWait = "30";
+
+// What all commands take, beside what Context holds.
+struct Options {
+  std::string socket;
+  double timeout = 5;
+  std::optional<double> wait;
+};
+
 constexpr const char* kDescription = "Talks to the audio reporting service and reads what it recorded.";
 constexpr const char* kFooter = R"(
 Results go to stdout, complaints to stderr. Exit status: 0 success; 64 wrong usage; 65 bad input data; 69 the service
@@ -23,17 +36,26 @@ can't be reached or the connection was lost; 1 any other failure.
 
 "tarnreportingctl COMMAND --help" tells more, with examples.)";
 
-void describe(CLI::App& app, Context& context) {
+void describe(CLI::App& app, Context& context, Options& options) {
   app.name("tarnreportingctl");
   app.description(kDescription);
   app.footer(kFooter);
   app.set_version_flag("--version", "tarnreportingctl " TARN_VERSION, "Print the version and exit");
-  app.add_option("--socket", context.socket, "The service's socket")->capture_default_str()->type_name("PATH");
+  app.add_option("--socket", options.socket,
+                 "The service's socket (default: $TARNREPORTING_SOCKET, else the user's, else the system's)")
+      ->type_name("PATH");
+  app.add_option("--timeout", options.timeout, "How many seconds an answer may take (default: 5); then 69")
+      ->type_name("S")
+      ->check(CLI::Range(0.001, kLongestSeconds));
+  app.add_option("--wait", options.wait,
+                 "First wait until the service is there, so many seconds (default: 30); then 69")
+      ->type_name("[=S]")
+      ->check(CLI::Range(0.0, kLongestSeconds));
   app.add_option("--state-dir", context.stateDirectory, "The service's state directory")
       ->capture_default_str()
       ->type_name("DIR");
   app.require_subcommand(1);
-  // The two options above may also stand after the command.
+  // The options above may also stand after the command.
   app.fallthrough();
   addRunCommand(app, context);
   addEventsCommand(app, context);
@@ -44,12 +66,27 @@ void describe(CLI::App& app, Context& context) {
   addStatusCommand(app, context);
   addLintCommand(app, context);
   addExplainCommand(app, context);
+  addCheckCommand(app, context);
+}
+
+// The words of the command line, last one first. A value of --wait stands behind a sign alone: what follows it is the
+// command's.
+std::vector<std::string> wordsOf(int argc, const char* const* argv) {
+  std::vector<std::string> words(argv + 1, argv + argc);
+  const auto end = std::find(words.begin(), words.end(), "--");
+  std::replace(words.begin(), end, std::string("--wait"), std::string("--wait=") + kUsualWait);
+  std::reverse(words.begin(), words.end());
+  return words;
+}
+
+std::chrono::milliseconds milliseconds(double seconds) {
+  return std::chrono::ceil<std::chrono::milliseconds>(std::chrono::duration<double>(seconds));
 }
 
 // Parses; `context.chosen` is what to do then, unless everything is done and the exit status returned.
-std::optional<int> parse(CLI::App& app, int argc, const char* const* argv) {
+std::optional<int> parse(CLI::App& app, std::vector<std::string> words) {
   try {
-    app.parse(argc, argv);
+    app.parse(std::move(words));
     return std::nullopt;
   } catch (const CLI::CallForHelp& help) {
     app.exit(help);
@@ -61,7 +98,7 @@ std::optional<int> parse(CLI::App& app, int argc, const char* const* argv) {
     // Words that belong to nothing are passed over until the end, and then the missing command is complained of.
     const auto unknown = app.get_subcommands().empty() ? app.remaining() : std::vector<std::string>();
     const std::string what = unknown.empty() ? error.what() : "there is no command or option " + unknown.front();
-    complain(printable(what) + " (--help tells more)");
+    complain(what + " (--help tells more)");
     return kWrongUsage;
   }
   std::cout.flush();
@@ -72,11 +109,21 @@ int mainProgram(int argc, const char* const* argv) {
   std::signal(SIGPIPE, SIG_IGN);
   Context context;
   const auto environment = linux_host::HostEnvironment::current();
-  context.socket = linux_host::defaultSocketPath(environment).value_or("");
+  context.socket.sockets = linux_host::serviceSocketPaths(environment);
   context.stateDirectory = linux_host::defaultStateDirectory(environment).value_or("");
   CLI::App app;
-  describe(app, context);
-  if (const auto status = parse(app, argc, argv)) return *status;
+  Options options;
+  describe(app, context, options);
+  if (const auto status = parse(app, wordsOf(argc, argv))) return *status;
+  if (!options.socket.empty()) {
+    context.socket.sockets = {options.socket};
+  }
+  context.socket.timeout = milliseconds(options.timeout);
+  if (options.wait) {
+    if (const int status = waitForService(context.socket, milliseconds(*options.wait)); status != kSuccess) {
+      return status;
+    }
+  }
   return context.chosen();
 }
 

@@ -17,7 +17,10 @@ EXCEPTIONS = {
     ("plist/Key.cpp", "instance"): "one copy of each text that never changes; keys are made before main",
     ("plist/KeyList.cpp", "instance"): "one copy of each key list that never changes, likewise",
     ("tools/ctl/EventsCommand.cpp", "stopRequested"): "a signal handler reaches nothing else",
+    ("recorder/store/MappedGuard.cpp", "guarded"): "a signal handler reaches nothing else",
+    ("recorder/store/MappedGuard.cpp", "once"): "the handler is installed once a process",
     ("host/loop/CurrentQueue.h", "current_"): "which queue a thread serves belongs to the thread",
+    ("host/log/LogClient.h", "current_"): "for whom a thread works belongs to the thread",
 }
 
 OTHER = re.compile(r"(?:using|typedef|static_assert|friend|template|concept|namespace|class|struct|union|enum|extern|"

@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "host/system/JsonValues.h"
+#include "plist/formats/Json.h"
 #include "tools/script/VocabularyNames.h"
 
 namespace tarn::script {
@@ -47,7 +48,12 @@ std::string quoted(std::string_view text) {
 // What a value is, for a complaint; long ones are cut.
 std::string shown(const ValueView& value) {
   constexpr std::size_t kMaxShown = 60;
-  std::string text = value.isText() ? quoted(value.text()) : plist::description(value);
+  std::string text;
+  if (value.isText()) {
+    text = quoted(value.text());
+  } else {
+    plist::appendJson(text, value);
+  }
   if (text.size() > kMaxShown) {
     std::size_t end = kMaxShown;
     while (end > 0 && (static_cast<unsigned char>(text[end]) & 0xC0U) == 0x80U) {

@@ -40,9 +40,16 @@ TEST(LogLine, HoldsTimeLevelCategoryAndText) {
             "1970-01-01T00:00:00.000000Z error tarnss                    Module:7     text\n");
 }
 
-TEST(LogLine, FurtherLinesFollowAsTheyAre) {
-  EXPECT_EQ(logLine(0, {kCategory, LogLevel::Info, {}, 0, "one\n  two"}),
-            "1970-01-01T00:00:00.000000Z info tarnss one\n  two\n");
+TEST(LogLine, FurtherLinesFollowEachAfterATab) {
+  EXPECT_EQ(
+      logLine(0, {kCategory, LogLevel::Info, {}, 0, "one\n  two\n1970-01-01T00:00:00.000000Z error tarnss forged"}),
+      "1970-01-01T00:00:00.000000Z info tarnss one\n\t  two\n\t1970-01-01T00:00:00.000000Z error tarnss forged\n");
+}
+
+TEST(LogLine, WhatATerminalWouldObeyIsWrittenOut) {
+  EXPECT_EQ(logLine(0, {kCategory, LogLevel::Debug, {}, 0, "a\tb\r\x1b[2J\x7f \u0085\u009b\u202e\u2066"}),
+            "1970-01-01T00:00:00.000000Z debug tarnss a\\u0009b\\u000d\\u001b[2J\\u007f "
+            "\\u0085\\u009b\\u202e\\u2066\n");
 }
 
 TEST(LogLine, LevelsHaveNamesBothWays) {

@@ -96,6 +96,40 @@ TEST_F(WatchdogTest, PingsThroughADeliberateWaitUpToItsLongest) {
   EXPECT_TRUE(watchdog_.check());
 }
 
+TEST_F(WatchdogTest, PingsAQueueThatWorksOnlyWhileOthersHaveTheirTurns) {
+  progress_.turn();
+  ASSERT_TRUE(watchdog_.check());
+  for (int look = 0; look < 4; ++look) {
+    clock_.advance(15s);
+    progress_.step();
+    EXPECT_TRUE(watchdog_.check()) << look;
+  }
+  clock_.advance(1ns);
+  progress_.step();
+  EXPECT_FALSE(watchdog_.check());
+  progress_.turn();
+  EXPECT_TRUE(watchdog_.check());
+}
+
+TEST_F(WatchdogTest, ADeliberateWaitAndRestAreTurns) {
+  progress_.turn();
+  ASSERT_TRUE(watchdog_.check());
+  clock_.advance(50s);
+  progress_.beginWait(clock_.monotonic());
+  EXPECT_TRUE(watchdog_.check());
+  progress_.endWait();
+  clock_.advance(50s);
+  progress_.step();
+  EXPECT_TRUE(watchdog_.check());
+  progress_.setIdle(true);
+  clock_.advance(1h);
+  EXPECT_TRUE(watchdog_.check());
+  progress_.setIdle(false);
+  clock_.advance(50s);
+  progress_.step();
+  EXPECT_TRUE(watchdog_.check());
+}
+
 TEST_F(WatchdogTest, StartsNothingWhenTheManagerDoesNotAsk) {
   progress_.setIdle(true);
   watchdog_.start();
@@ -139,12 +173,12 @@ TEST_F(ServiceManagerTest, IsToldThatTheServiceIsReadyAndThatItStops) {
   EXPECT_EQ(testing::inChild([this] {
               ::setenv("NOTIFY_SOCKET", path_.c_str(), 1);
               ServiceManager().notifyReady();
-              ServiceManager().notifyStopping();
+              ServiceManager().notifyStopping(10s);
               return 0;
             }),
             0);
   EXPECT_EQ(received(), "READY=1");
-  EXPECT_EQ(received(), "STOPPING=1");
+  EXPECT_EQ(received(), "STOPPING=1\nEXTEND_TIMEOUT_USEC=10000000");
 }
 
 TEST_F(ServiceManagerTest, TellsItsIntervalAndTakesPings) {

@@ -108,6 +108,18 @@ TEST_F(LinuxFileSystemTest, OpeningForWritingEmptiesTheFile) {
   EXPECT_EQ(content("file"), "one\ntwo\n");
 }
 
+TEST_F(LinuxFileSystemTest, ALinkIsNeitherWrittenThroughNorMadeOver) {
+  put("target", "untouched");
+  std::filesystem::create_symlink(path("target"), path("link"));
+  const auto opened = files_.openForWriting(path("link"));
+  ASSERT_TRUE(opened.failed());
+  EXPECT_EQ(opened.error->code, ELOOP);
+  const auto made = files_.createFile(path("link"));
+  ASSERT_TRUE(made.failed());
+  EXPECT_EQ(made->code, EEXIST);
+  EXPECT_EQ(content("target"), "untouched");
+}
+
 TEST_F(LinuxFileSystemTest, AFileDestroyedUnclosedHoldsWhatWasWritten) {
   put("file", "");
   ASSERT_TRUE(files_.openForWriting(path("file")).value->write("kept").ok());

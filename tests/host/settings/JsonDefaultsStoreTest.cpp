@@ -38,6 +38,14 @@ class JsonDefaults : public ::testing::Test {
   JsonDefaultsStore store_{folder_.path("defaults"), log_};
 };
 
+TEST_F(JsonDefaults, LinkIsNotFollowed) {
+  folder_.write("elsewhere.json", "{\"a\": 1}");
+  folder_.write("defaults/other.json", "{}");  // so that the folder is there
+  std::filesystem::create_symlink(folder_.path("elsewhere.json"), folder_.path(kFile));
+  EXPECT_FALSE(store_.value(kSuite, "a").present());
+  EXPECT_EQ(faults().size(), 1U);
+}
+
 TEST_F(JsonDefaults, UnknownSuiteKeyAndUserReadAbsentWithoutALine) {
   EXPECT_FALSE(store_.value(kSuite, "device_name").present());
   ASSERT_TRUE(store_.setValue(kSuite, "device_name", "bench"));

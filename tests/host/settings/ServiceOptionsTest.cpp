@@ -28,6 +28,32 @@ std::string complaintOf(std::vector<const char*> arguments, const HostEnvironmen
   return command.usage.text();
 }
 
+TEST(HostPaths, ConfigurationIsThatOfTheProgramsInstallation) {
+  const auto of = [](const char* program) {
+    HostEnvironment environment = kUser;
+    environment.program = program;
+    return defaultConfigurationFile(environment);
+  };
+  EXPECT_EQ(of("/usr/bin/tarnreportingd"), "/etc/tarnreporting/tarnreportingd.toml");
+  EXPECT_EQ(of("/bin/tarnreportingd"), "/etc/tarnreporting/tarnreportingd.toml");
+  EXPECT_EQ(of("/usr/local/bin/tarnreportingd"), "/usr/local/etc/tarnreporting/tarnreportingd.toml");
+  EXPECT_EQ(of("/opt/x/bin/tarnreportingd"), "/etc/opt/x/tarnreporting/tarnreportingd.toml");
+  EXPECT_EQ(of("/srv/tree/build/bin/tarnreportingd"), "/srv/tree/build/etc/tarnreporting/tarnreportingd.toml");
+  EXPECT_EQ(of("an unknown program"), "");
+  EXPECT_EQ(of(""), "");
+}
+
+TEST(HostPaths, ClientsLookAtTheNamedSocketElseTheUsersThenTheSystems) {
+  using Paths = std::vector<std::string>;
+  HostEnvironment environment = kUser;
+  EXPECT_EQ(serviceSocketPaths(environment), (Paths{"/run/user/7/tarnreporting.sock", "/run/tarnreporting/socket"}));
+  environment.runtimeDirectory = "";
+  EXPECT_EQ(serviceSocketPaths(environment), (Paths{"/run/tarnreporting/socket"}));
+  environment.serviceSocket = "/srv/socket";
+  EXPECT_EQ(serviceSocketPaths(environment), (Paths{"/srv/socket"}));
+  EXPECT_EQ(serviceSocketPaths({true, "/run/user/0", "", ""}), (Paths{"/run/tarnreporting/socket"}));
+}
+
 TEST(ServiceOptions, DefaultsFollowTheUsersFolders) {
   const ServiceCommand command = parse({});
   ASSERT_TRUE(command.options);

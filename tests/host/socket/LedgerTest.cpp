@@ -14,7 +14,7 @@ TEST(Ledger, StatusHasEveryMemberFromTheStart) {
   const auto status = Ledger().status(0, 0, {});
   for (const char* member : {"frames_received", "messages_received", "replies_sent", "connections_open",
                              "connections_total", "sessions", "queued", "recorder_handed_over", "recorder_committed",
-                             "recorder_waiting", "recorder_expired", "recorder_failed"}) {
+                             "recorder_waiting", "recorder_expired", "recorder_failed", "recorder_lost_before"}) {
     EXPECT_EQ(status.get(member), plist::ValueView(0)) << member;
   }
   EXPECT_EQ(plist::description(status.get("requests_refused")),
@@ -24,7 +24,7 @@ TEST(Ledger, StatusHasEveryMemberFromTheStart) {
 }
 
 TEST(Ledger, StatusTellsWhatOthersCount) {
-  const auto status = Ledger().status(3, 4, {10, 7, 2, 5, 1});
+  const auto status = Ledger().status(3, 4, {10, 7, 2, 5, 1, 6});
   EXPECT_EQ(status.get("sessions").asInt64(), 3);
   EXPECT_EQ(status.get("queued").asInt64(), 4);
   EXPECT_EQ(status.get("recorder_handed_over").asInt64(), 10);
@@ -32,6 +32,7 @@ TEST(Ledger, StatusTellsWhatOthersCount) {
   EXPECT_EQ(status.get("recorder_waiting").asInt64(), 2);
   EXPECT_EQ(status.get("recorder_expired").asInt64(), 5);
   EXPECT_EQ(status.get("recorder_failed").asInt64(), 1);
+  EXPECT_EQ(status.get("recorder_lost_before").asInt64(), 6);
 }
 
 TEST(Ledger, CountsRefusalsAndCutsByReason) {

@@ -1,5 +1,6 @@
 // Connections in order: requests, replies, and the end.
 
+#include <filesystem>
 #include <thread>
 
 #include "tests/host/socket/SocketFixture.h"
@@ -151,7 +152,8 @@ TEST_F(SocketConnectionTest, KnowsThePeersProcess) {
   client.status();
   EXPECT_EQ(running_.onQueue([this] { return service_->processIdentifiers.at(0); }), ::getpid());
   EXPECT_EQ(running_.onQueue([this] { return service_->descriptions.at(0); }),
-            "connection 1 of process " + std::to_string(::getpid()));
+            "connection 1 of process " + std::to_string(::getpid()) + ", uid " + std::to_string(::getuid()) + ", " +
+                std::filesystem::canonical("/proc/self/exe").string());
 }
 
 TEST_F(SocketConnectionTest, StatusIsAnsweredByTheHost) {

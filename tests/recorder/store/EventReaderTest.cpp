@@ -163,7 +163,7 @@ TEST_F(EventReaderTest, FollowsIntoAFileWhoseIdsBeginAnew) {
   query.after = reader.read(query).lookedUpTo;
   ASSERT_EQ(query.after, 5);
   stop();
-  for (const char* const suffix : {"", "-wal", "-shm"}) {
+  for (const char* const suffix : {"", "-wal", "-shm", ".counts"}) {
     std::filesystem::remove(file().string() + suffix);
   }
   EXPECT_EQ(reader.read(query).status, Status::Missing);

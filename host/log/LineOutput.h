@@ -1,0 +1,49 @@
+// LineOutput: log lines to a descriptor: what the standard error stream and a log file have in common.
+//
+// A line is written whole, so that those of several processes that share the descriptor don't mix; one that is cut off
+// by a full disk or a slow reader is carried on where it stopped. Threads: the log's own.
+#pragma once
+
+#include <cstddef>
+#include <string>
+#include <string_view>
+
+#include "host/log/LogOutput.h"
+
+namespace tarn::linux_host {
+
+class LineOutput : public LogOutput {
+ public:
+  LineOutput(const LineOutput&) = delete;
+  LineOutput& operator=(const LineOutput&) = delete;
+
+  std::string formed(double epochSeconds, const platform::LogEntry& entry) const final;
+  int write(std::string_view bytes) final;
+
+ protected:
+  LineOutput() = default;
+
+  // Where the next bytes go, or a negative errno value.
+  virtual int descriptor() = 0;
+  // Of another descriptor than before: a line that was begun there is begun anew.
+  void beginAnew() noexcept { written_ = 0; }
+  // For a descriptor other than a file's: it may be full for as long as its reader likes.
+  void setMayStall(bool mayStall) noexcept { mayStall_ = mayStall; }
+
+ private:
+  bool mayStall_ = false;
+  std::size_t written_ = 0;  // of the line that is being written
+};
+
+// The standard error stream, or another descriptor that is open already. It isn't closed.
+class StreamOutput final : public LineOutput {
+ public:
+  explicit StreamOutput(int descriptor);
+
+ private:
+  int descriptor() override { return descriptor_; }
+
+  const int descriptor_;
+};
+
+}  // namespace tarn::linux_host

@@ -1,0 +1,20 @@
+#include "host/log/PrefixedLog.h"
+
+#include "platform/LogPrefix.h"
+
+namespace tarn::linux_host {
+
+void logPrefixed(platform::Log& log, const platform::LogCategory& category, platform::LogLevel level,
+                 std::string_view module, std::string_view text, int line) {
+  if (level < log.threshold()) return;
+  log.write({category, level, module, line, prefixed(module, text, line)});
+}
+
+std::string prefixed(std::string_view module, std::string_view text, int line) {
+  std::string whole;
+  platform::appendLogPrefix(whole, module, line);
+  whole += text;
+  return whole;
+}
+
+}  // namespace tarn::linux_host

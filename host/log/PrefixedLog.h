@@ -1,0 +1,28 @@
+// logPrefixed: the log lines of the host's own parts (loop, listener, connections) in the form of all others: the text
+// stands behind the prefix "%25s:%-5d " (module, line). Threads: any.
+#pragma once
+
+#include <string>
+#include <string_view>
+
+#include "host/system/SystemError.h"
+#include "platform/Log.h"
+
+namespace tarn::linux_host {
+
+// What happens on a client's connection.
+inline constexpr platform::LogCategory kConnectionCategory{"sys.oxbow.tarnkit", "tarnrc"};
+// Everything else of the host: listener, loop, signals, watchdog.
+inline constexpr platform::LogCategory kHostCategory{"sys.oxbow.tarnkit", "tarnrs"};
+// The driver report channels.
+inline constexpr platform::LogCategory kDriverCategory{"sys.oxbow.tarnkit", "tarnrd"};
+// The performance traces and their analysis.
+inline constexpr platform::LogCategory kTraceCategory{"sys.oxbow.tarnkit", "tarnrt"};
+
+void logPrefixed(platform::Log& log, const platform::LogCategory& category, platform::LogLevel level,
+                 std::string_view module, std::string_view text, int line = __builtin_LINE());
+
+// The text with the prefix of its module and line, as every line has it.
+std::string prefixed(std::string_view module, std::string_view text, int line = __builtin_LINE());
+
+}  // namespace tarn::linux_host

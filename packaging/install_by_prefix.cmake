@@ -1,0 +1,15 @@
+# What of an installation depends on its prefix: the paths inside the units, and the place of the configuration, which
+# for /usr is /etc and for a prefix in /opt lies below /etc too. The service looks for it there (HostPaths).
+set(prefix "${CMAKE_INSTALL_PREFIX}")
+if(prefix STREQUAL "/usr" OR prefix STREQUAL "/")
+  set(configuration /etc)
+elseif(prefix MATCHES "^/opt/")
+  set(configuration "/etc${prefix}")
+else()
+  set(configuration "${prefix}/etc")
+endif()
+foreach(unit tarnreportingd.service tarnreportingd.socket)
+  configure_file("${TARN_PACKAGING}/systemd/${unit}.in" "${TARN_SCRATCH}/${unit}" @ONLY)
+  file(INSTALL "${TARN_SCRATCH}/${unit}" DESTINATION "${prefix}/${TARN_UNIT_DIR}")
+endforeach()
+file(INSTALL "${TARN_PACKAGING}/tarnreportingd.toml" DESTINATION "${configuration}/tarnreporting")

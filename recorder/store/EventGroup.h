@@ -1,0 +1,56 @@
+// EventGroup: the checksums of some events with neighbouring ids, and when they were committed, as one row of the table
+// event_groups(first, seconds, hashes).
+//
+// Which problem: a checksum beside each row would cost a row of its own or a column that everybody sees; one for a
+// whole commit couldn't tell which of its events is damaged. How: one row holds the checksums of up to 64 events, and
+// one of itself behind them.
+//
+//   hashes: 8 bytes (little-endian) an event, then 8 bytes over `first`, `seconds` and those before
+//
+// Threads: one at a time.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <string_view>
+
+namespace tarn::recorder {
+
+struct StoredEvent {
+  double time;
+  std::string_view backend;
+  std::string_view name;
+  std::string_view payload;
+  std::string_view detail;
+};
+
+std::uint64_t hashOf(std::int64_t id, const StoredEvent& event) noexcept;
+
+class EventGroup {
+ public:
+  static constexpr std::int64_t kMostEvents = 64;
+
+  // An empty one, whose first event will be `first`.
+  void begin(std::int64_t first, double seconds);
+  void add(std::uint64_t hash);
+  // The row of the group as it is now.
+  std::string hashes() const;
+  // Takes a row of the table; false when its own checksum says that it is damaged.
+  [[nodiscard]] bool read(std::int64_t first, double seconds, std::string_view hashes);
+
+  std::int64_t first() const noexcept { return first_; }
+  std::int64_t size() const noexcept;
+  std::int64_t end() const noexcept { return first_ + size(); }  // the id after the last one
+  double seconds() const noexcept { return seconds_; }
+  bool holds(std::int64_t id) const noexcept { return id >= first_ && id < end(); }
+  std::uint64_t hash(std::int64_t id) const noexcept;
+
+ private:
+  std::uint64_t ownHash() const noexcept;
+
+  std::int64_t first_ = 0;
+  double seconds_ = 0;
+  std::string bytes_;  // of the events' checksums
+};
+
+}  // namespace tarn::recorder

@@ -1,0 +1,18 @@
+// Remedy: what helps against a failure of the store. The code of a store's error is SQLite's result code; it alone
+// decides. Threads: any.
+#pragma once
+
+#include <cstdint>
+
+namespace tarn::recorder {
+
+enum class Remedy : std::uint8_t {
+  Wait,      // a passing fault (a full disk, a lock): the same again later
+  Reopen,    // a fault that a new connection may heal: open again later
+  Moved,     // the file at the path isn't the open one any more
+  SetAside,  // the file can't be used: damaged, no database, or somebody else's; to be proven by a second look
+};
+
+Remedy remedyFor(std::int64_t code) noexcept;
+
+}  // namespace tarn::recorder

@@ -1,0 +1,37 @@
+// StateUsage: what the files beside the recorder's database take of the cap that holds for all of them.
+//
+//   cap = database + its log + index and counts + files set aside + the folders that others write
+//
+// Each kind but the database has a share. Beyond it files set aside go, the last one first: the first tells how the
+// trouble began. Of a folder's files the oldest go. What is left of the cap is the database's. Nothing but regular
+// files is looked at or removed, and no link is followed. Owner: the event writer. Threads: the writer's.
+#pragma once
+
+#include <cstdint>
+#include <filesystem>
+#include <string>
+#include <vector>
+
+namespace tarn::recorder {
+
+class StateUsage {
+ public:
+  StateUsage(std::filesystem::path file, std::vector<std::filesystem::path> folders, std::int64_t cap)
+      : file_(std::move(file)), folders_(std::move(folders)), cap_(cap) {}
+
+  // Looks at all of it and removes what is beyond the shares; the names of what was removed.
+  std::vector<std::string> tidy();
+  // What the database may take beside a log of this size.
+  std::int64_t databaseBytes(std::int64_t logBytes) const noexcept;
+
+ private:
+  const std::filesystem::path file_;
+  const std::vector<std::filesystem::path> folders_;
+  const std::int64_t cap_;
+  std::int64_t beside_ = 0;  // of all but the database and its log
+};
+
+// Which other processes keep the log's index of this database locked for reading: "1234 (name)" each.
+std::vector<std::string> readersOf(const std::filesystem::path& database);
+
+}  // namespace tarn::recorder

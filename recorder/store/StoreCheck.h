@@ -1,0 +1,79 @@
+// StoreCheck: compares the recorder's rows with their checksums, group by group, in steps as long as one likes.
+//
+// Every id after those that retention removed is either there and as it was written, or unproven (its row is there, its
+// checksum isn't), or lost. Events that were written before there were checksums are taken as they are. Finalized
+// before its connection closes. Threads: the connection's.
+#pragma once
+
+#include <chrono>
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "plist/Result.h"
+#include "recorder/store/Connection.h"
+#include "recorder/store/EventGroup.h"
+#include "recorder/store/Statement.h"
+
+namespace tarn::recorder {
+
+// Ids from the first to the last.
+struct IdRange {
+  std::int64_t first = 0;
+  std::int64_t last = 0;
+  std::int64_t count() const noexcept { return last - first + 1; }
+  friend bool operator==(const IdRange&, const IdRange&) = default;
+};
+
+// Adds to ranges that rise, joining neighbours.
+void addRange(std::vector<IdRange>& ranges, IdRange range);
+std::int64_t countOf(const std::vector<IdRange>& ranges);
+// "3, 5-9 and 2 more ranges": the first eight.
+std::string textOf(const std::vector<IdRange>& ranges);
+
+class StoreCheck {
+ public:
+  explicit StoreCheck(Connection& connection) : connection_(connection) {}
+  StoreCheck(const StoreCheck&) = delete;
+  StoreCheck& operator=(const StoreCheck&) = delete;
+
+  // Begins anew. An error is one of reading; the check is then to be begun anew.
+  [[nodiscard]] Status begin();
+  // Passes over what is too damaged to be read, and counts it as lost.
+  void tolerateDamage() noexcept { tolerant_ = true; }
+  // Goes on until the deadline; at least one group is looked at.
+  [[nodiscard]] Status goOn(std::chrono::steady_clock::time_point deadline);
+  bool isDone() const noexcept { return done_; }
+  void finalize() noexcept;
+
+  // What was found so far: how many rows are as they were written, and the ids of those that aren't. Known are the ids
+  // that the recorder itself has noted as lost.
+  std::int64_t good() const noexcept { return good_; }
+  const std::vector<IdRange>& unproven() const noexcept { return unproven_; }
+  const std::vector<IdRange>& lost() const noexcept { return lost_; }
+  const std::vector<IdRange>& knownLost() const noexcept { return knownLost_; }
+
+ private:
+  [[nodiscard]] Status readKnown();
+  [[nodiscard]] Status lookAtGroup();
+  [[nodiscard]] Status lookAtRows(std::int64_t first, std::int64_t end, const EventGroup* group);
+  void lookAtRow(std::int64_t id, const EventGroup* group);
+  [[nodiscard]] Status finish();
+  void lose(std::int64_t first, std::int64_t end);
+
+  Connection& connection_;
+  Statement groups_;
+  Statement rows_;
+  EventGroup group_;
+  std::int64_t next_ = 0;  // the id that must come next
+  bool done_ = true;
+  bool tolerant_ = false;
+  int stridesLeft_ = 0;
+  std::int64_t good_ = 0;
+  std::vector<IdRange> unproven_;
+  std::vector<IdRange> lost_;
+  std::vector<IdRange> knownLost_;
+  std::vector<IdRange> known_;  // as noted
+};
+
+}  // namespace tarn::recorder

@@ -1,0 +1,21 @@
+// StoreLayout: what the recorder's database must be like before anything is written to it: sound pages, and the tables
+// that a recorder makes. Each answers nothing, or what is wrong under SQLite's code for it. Threads: the connection's.
+#pragma once
+
+#include <cstdint>
+
+#include "plist/Result.h"
+#include "recorder/store/Connection.h"
+
+namespace tarn::recorder {
+
+// How the connection is to work; makes the page layout of a file that is empty yet.
+[[nodiscard]] Status prepareConnection(Connection& connection);
+// Reads the whole file. A page that can't be read is no damage: the error is then that of the reading.
+[[nodiscard]] Status checkPages(Connection& connection);
+// Makes the tables where there are none, and says so; ids of a fresh file go on after `lastId`.
+[[nodiscard]] Status checkTables(Connection& connection, std::int64_t lastId, bool& made);
+// The greatest id that the file has given to an event.
+[[nodiscard]] Result<std::int64_t> readLastId(Connection& connection);
+
+}  // namespace tarn::recorder

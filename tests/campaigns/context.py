@@ -1,0 +1,64 @@
+"""What a campaign is given: programs, shims, its time, its random numbers, a folder, and where it tells what failed."""
+
+import os
+import random
+import resource
+import time
+from dataclasses import dataclass, field
+
+from control import Control, shim
+from service import Service
+
+# Nothing is removed for want of room: what was recorded stays to be counted.
+NOTHING_EXPIRES = "[recorder]\nmax_megabytes = 4096\n"
+
+
+@dataclass
+class Context:
+    service_program: str
+    shims: str
+    folder: str
+    seconds: float
+    seed: int
+    brief: bool = False  # among other tests, on a busy machine: what the clock alone decides is told, but fails nothing
+    failures: list = field(default_factory=list)
+    services: list = field(default_factory=list)
+    begun: float = field(default_factory=time.monotonic)
+    folders: int = 0
+
+    def __post_init__(self):
+        self.random = random.Random(self.seed)
+
+    def left(self):
+        return self.seconds - (time.monotonic() - self.begun)
+
+    def fail(self, text):
+        self.failures.append(text)
+
+    def new_folder(self):
+        self.folders += 1
+        path = os.path.join(self.folder, str(self.folders))
+        os.mkdir(path)
+        return path
+
+    def new_service(self, configuration=NOTHING_EXPIRES, **options):
+        service = Service(self.service_program, self.new_folder(), configuration, **options)
+        self.services.append(service)
+        return service
+
+    def new_control(self):
+        self.folders += 1
+        return Control(os.path.join(self.folder, f"control-{self.folders}"))
+
+    def shim(self, name):
+        return shim(self.shims, name)
+
+    def end(self):
+        for service in self.services:
+            service.kill()
+
+
+def raise_descriptor_limit():
+    """As many descriptors as the system lets this program have; many campaigns hold a thousand connections."""
+    _, most = resource.getrlimit(resource.RLIMIT_NOFILE)
+    resource.setrlimit(resource.RLIMIT_NOFILE, (most, most))

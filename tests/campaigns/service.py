@@ -1,0 +1,141 @@
+"""The real service on private directories: started, waited for, killed, and its store read as anybody would."""
+
+import ctypes
+import os
+import select
+import signal
+import socket
+import sqlite3
+import subprocess
+import time
+
+import wire
+
+PATIENCE = 30
+PARENT_DEATH_SIGNAL = 1
+LIBC = ctypes.CDLL(None)
+
+
+def end_with_parent():
+    """In a child: it is killed when the campaign ends, however that ends."""
+    LIBC.prctl(PARENT_DEATH_SIGNAL, signal.SIGKILL)
+
+
+class Service:
+    """One state directory and one socket, with at most one running service; started as often as a campaign likes."""
+
+    def __init__(self, program, folder, configuration="", environment=None, arguments=()):
+        self.program, self.folder = program, folder
+        os.makedirs(folder, exist_ok=True)
+        self.state = os.path.join(folder, "state")
+        self.socket = os.path.join(folder, "socket")
+        self.log = os.path.join(folder, "log")
+        self.configuration = os.path.join(folder, "config.toml")
+        self.environment = dict(environment or {})
+        self.arguments = list(arguments)
+        self.process = None
+        with open(self.configuration, "w", encoding="utf-8") as file:
+            file.write(configuration)
+
+    @property
+    def store(self):
+        return os.path.join(self.state, "recorder.sqlite3")
+
+    def start(self, environment=None, patience=PATIENCE):
+        """Starts it and waits until it is ready. Whether it is: False when it ended instead."""
+        path = os.path.join(self.folder, "notify")
+        if os.path.exists(path):
+            os.unlink(path)
+        with socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM) as manager, open(self.log, "ab") as log:
+            manager.bind(path)
+            self.process = subprocess.Popen(
+                [self.program, "--socket", self.socket, "--state-dir", self.state, "--config", self.configuration,
+                 "--log-level", "error", *self.arguments],
+                stdin=subprocess.DEVNULL, stdout=log, stderr=log, preexec_fn=end_with_parent,
+                env={**os.environ, "NOTIFY_SOCKET": path, **self.environment, **(environment or {})})
+            return self.wait_until_ready(manager, patience)
+
+    def wait_until_ready(self, manager, patience):
+        begun = time.monotonic()
+        while self.process.poll() is None:
+            if select.select([manager], [], [], 0.02)[0] and b"READY=1" in manager.recv(4096):
+                return True
+            waited = time.monotonic() - begun
+            # The word to the manager may be what the campaign lets fail.
+            if waited > 1 and self.is_listening():
+                return True
+            if waited > patience:
+                self.kill()
+                raise TimeoutError(f"the service wasn't ready within {patience} s")
+        return False
+
+    def is_listening(self):
+        try:
+            wire.Client(self.socket, 1).close()
+        except OSError:
+            return False
+        return True
+
+    def connect(self, patience=PATIENCE):
+        return wire.Client(self.socket, patience)
+
+    def is_running(self):
+        return self.process is not None and self.process.poll() is None
+
+    def ends_within(self, seconds):
+        """Whether it ends by itself in that time; one that dies closes its sockets some moments before."""
+        try:
+            self.process.wait(seconds)
+        except subprocess.TimeoutExpired:
+            return False
+        return True
+
+    def kill(self):
+        if self.process is not None:
+            self.process.kill()
+            self.process.wait()
+
+    def stop(self, number=signal.SIGTERM, patience=PATIENCE):
+        """Its exit status (negative: the signal that ended it), None when it had to be killed at the deadline."""
+        self.process.send_signal(number)
+        try:
+            return self.process.wait(patience)
+        except subprocess.TimeoutExpired:
+            self.kill()
+            return None
+
+    def log_text(self):
+        try:
+            with open(self.log, encoding="utf-8", errors="replace") as file:
+                return file.read()
+        except FileNotFoundError:
+            return ""
+
+    def forget_log(self):
+        open(self.log, "wb").close()
+
+    def reader(self):
+        return sqlite3.connect(f"file:{self.store}?mode=ro", uri=True, timeout=10, check_same_thread=False,
+                               isolation_level=None)
+
+    def memory_peak(self):
+        """MiB that were resident at the most since the start."""
+        with open(f"/proc/{self.process.pid}/status", encoding="ascii") as file:
+            for line in file:
+                if line.startswith("VmHWM:"):
+                    return int(line.split()[1]) / 1024
+        return 0.0
+
+
+def settled(client, patience=PATIENCE):
+    """Waits until all that the service took is committed, by the settle operation or by the ledger."""
+    if client.settle():
+        return
+    deadline = time.monotonic() + patience
+    while True:
+        status = client.call(wire.STATUS)
+        if status["queued"] == 0 and status["recorder_waiting"] == 0:
+            return
+        if time.monotonic() > deadline:
+            raise wire.WireError("what was sent isn't committed in time")
+        time.sleep(0.002)
