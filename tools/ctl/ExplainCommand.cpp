@@ -82,7 +82,10 @@ class Explanation {
 
  private:
   void title(std::string_view text) {
-    output_.line(std::string(found_ ? "\n" : "") + std::string(text));
+    if (found_) {
+      output_.line("");
+    }
+    output_.line(text);
     found_ = true;
   }
   // A row with its label; nothing for an empty text.
@@ -92,10 +95,10 @@ class Explanation {
     line.resize(std::max(line.size() + 1, kLabelWidth + 2), ' ');
     output_.line(line + std::string(text));
   }
-  void lines(std::string_view text) {
+  void lines(std::string_view text, std::string_view indent = "    ") {
     while (!text.empty()) {
       const std::size_t end = std::min(text.find('\n'), text.size());
-      output_.line("    " + std::string(text.substr(0, end)));
+      output_.line(std::string(indent) + std::string(text.substr(0, end)));
       text.remove_prefix(std::min(end + 1, text.size()));
     }
   }
@@ -194,7 +197,7 @@ int Explanation::explain() {
 int Explanation::printScript() {
   for (const DerivedMessage& message : dictionary::derived()) {
     if (means(name_, message.name)) {
-      output_.line(message.script.substr(0, message.script.size() - 1));
+      lines(message.script, "");
       return output_.status();
     }
   }
