@@ -101,7 +101,9 @@ TEST_F(Ctl, EveryCommandHasItsHelp) {
                                                 {"notify", "--help"},
                                                 {"reporters", "--help"},
                                                 {"kill", "--help"},
-                                                {"status", "--help"}}) {
+                                                {"status", "--help"},
+                                                {"lint", "--help"},
+                                                {"explain", "--help"}}) {
     const Finished finished = ctl(words);
     EXPECT_EQ(finished.status, 0) << words.front();
     EXPECT_NE(finished.output.find("tarnreportingctl"), std::string::npos) << words.front();

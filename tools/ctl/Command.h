@@ -29,6 +29,8 @@ void addNotifyCommand(CLI::App& app, Context& context);
 void addReportersCommand(CLI::App& app, Context& context);
 void addKillCommand(CLI::App& app, Context& context);
 void addStatusCommand(CLI::App& app, Context& context);
+void addLintCommand(CLI::App& app, Context& context);
+void addExplainCommand(CLI::App& app, Context& context);
 void addCheckCommand(CLI::App& app, Context& context);
 
 }  // namespace tarn::ctl

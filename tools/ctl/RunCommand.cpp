@@ -1,4 +1,3 @@
-#include <fcntl.h>
 #include <unistd.h>
 
 #include <CLI/CLI.hpp>
@@ -10,6 +9,7 @@
 #include "host/system/SystemError.h"
 #include "tools/ctl/Command.h"
 #include "tools/ctl/ExitStatus.h"
+#include "tools/ctl/InputFile.h"
 #include "tools/ctl/Output.h"
 #include "tools/ctl/ScriptPlayer.h"
 #include "wire/Request.h"
@@ -67,28 +67,6 @@ Example:
   {"op": "sendMessage", "reporterIDs": [7], "category": "Playback", "type": "Start", "message": {"volume": 0.5}}
   {"op": "stopReportingSessionForID", "reporterID": 7}
   END)";
-
-// Closes what it opened.
-class InputFile {
- public:
-  explicit InputFile(const std::string& path)
-      : isStandardInput_(path == "-"),
-        fd_(isStandardInput_ ? STDIN_FILENO : ::open(path.c_str(), O_RDONLY | O_CLOEXEC)) {}
-  ~InputFile() {
-    if (!isStandardInput_ && fd_ >= 0) {
-      ::close(fd_);
-    }
-  }
-  InputFile(const InputFile&) = delete;
-  InputFile& operator=(const InputFile&) = delete;
-
-  int fd() const { return fd_; }
-  bool isStandardInput() const { return isStandardInput_; }
-
- private:
-  bool isStandardInput_;
-  int fd_;
-};
 
 int run(const Context& context, const std::string& path) {
   const InputFile file(path);

@@ -64,6 +64,8 @@ void describe(CLI::App& app, Context& context, Options& options) {
   addReportersCommand(app, context);
   addKillCommand(app, context);
   addStatusCommand(app, context);
+  addLintCommand(app, context);
+  addExplainCommand(app, context);
   addCheckCommand(app, context);
 }
 

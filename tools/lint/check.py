@@ -1,7 +1,7 @@
 #!/usr/bin/env python3
 """Runs the checks of this folder over the tree and prints what they find, a line each. Exit 1 when there is anything.
 
-usage: check.py [include_graph|banned_calls|bodies|seeds|sizes|statics|wording ...]
+usage: check.py [include_graph|banned_calls|bodies|dictionary|seeds|sizes|statics|wording ...]
 """
 
 import os
@@ -9,6 +9,7 @@ import sys
 
 import banned_calls
 import bodies
+import dictionary
 import include_graph
 import seeds
 import sizes
@@ -16,7 +17,7 @@ import statics
 import wording
 from tree import Tree
 
-MODULES = (include_graph, banned_calls, bodies, seeds, sizes, statics, wording)
+MODULES = (include_graph, banned_calls, bodies, dictionary, seeds, sizes, statics, wording)
 CHECKS = {module.__name__: module.check for module in MODULES}
 
 

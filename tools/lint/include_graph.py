@@ -34,6 +34,8 @@ ROOMS = {
     "clients/ring": (),
     "clients/c/include": (),
     "clients/c/src": ("clients/ring", "clients/c/include"),
+    # What can be said, as data, and the constants that are made of it.
+    "dictionary": (),
     "platform": VALUES,
     "service/vocabulary": BASE,
     "session": BASE + ("service/vocabulary",),
@@ -57,7 +59,7 @@ ROOMS = {
     "testing": BASE + ("service/vocabulary", "testing/backends"),
     "tools/script": PROGRAM,
     "tools/mutate": (),
-    "tools/ctl": PROGRAM + ("client", "tools/script"),
+    "tools/ctl": PROGRAM + ("client", "dictionary", "tools/script"),
     # What checks the service shares no code with it, but for the client and the reader of the recorder's file.
     "tests/scenario": VALUES + ("client", "wire", "recorder/store"),
 }
