@@ -498,6 +498,7 @@ void TarnReportingClientServerInstance::endClient() {
     }
   }
   service->removeClient(*this);
+  index_ = nullptr;  // sessions that it still makes are for nobody else to find
   kLog(LogLevel::Default, "removing %i from the server client list", processIdentifier_);
 }
 

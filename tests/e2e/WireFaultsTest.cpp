@@ -72,7 +72,7 @@ TEST_F(WireFaults, AnUnknownOperationIsRefusedAndTheConnectionGoesOn) {
   RawSocket socket(this->socket());
   EXPECT_EQ(answerTo(socket, "\x82\x01\x00"s), 1);
   EXPECT_EQ(answerTo(socket, "\x82\x01\x0c"s), 1);
-  EXPECT_EQ(answerTo(socket, "\x82\x01\x18\x65"s), 1);
+  EXPECT_EQ(answerTo(socket, "\x82\x01\x18\x7f"s), 1);
   EXPECT_EQ(answerTo(socket, kGetAllReporters), 0);
 }
 
