@@ -44,7 +44,7 @@ ConnectionRings::Opened ConnectionRings::open(std::vector<UniqueDescriptor> desc
                                                      }
                                                    });
   // By the edge: nobody reads it, so it stays ready.
-  if (!board_.loop.watch(reader->wakeDescriptor(), EPOLLIN | EPOLLET, reader)) return refuse(RingFault::System);
+  if (board_.loop.watch(reader->wakeDescriptor(), EPOLLIN | EPOLLET, reader).failed()) return refuse(RingFault::System);
   reader->lastRecord = board_.loop.clock().monotonic();
   buffer_.resize(std::max<std::size_t>(buffer_.size(), reader->consumer().mostContent()));
   rings_.push_back(reader);

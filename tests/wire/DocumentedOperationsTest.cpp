@@ -46,7 +46,8 @@ std::vector<Cells> documentedRows() {
 std::string documentedArguments(const ArgumentList& arguments) {
   // In the order of Argument; which dictionary it is the operation tells.
   constexpr std::array kNames = {
-      "reporter ID", "service type", "dictionary", "dictionary", "category", "type", "array of reporter IDs or null"};
+      "reporter ID", "service type", "dictionary", "dictionary", "category", "type", "array of reporter IDs or null",
+      "dictionary"};
   static_assert(kNames.size() == kArguments.size());
   std::string text;
   for (const Argument argument : arguments) {
