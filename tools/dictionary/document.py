@@ -14,6 +14,8 @@ that it makes of others, each with an example. This page is made from `{PATH}`
 (`python3 tools/dictionary/generate.py`), as are the constants for C, C++ and Python. A check holds the table against
 the code, and a test plays the examples against the service.
 
+<!-- not run: a synopsis -->
+
     tarnreportingctl explain KvSessionVolume          what this page says of a name or a key
     tarnreportingctl lint player.jsonl                what in a script is unknown, of a wrong kind or unit, or unread
 
