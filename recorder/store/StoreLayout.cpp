@@ -17,6 +17,8 @@ constexpr std::string_view kEventColumns =
     "id INTEGER 1,time REAL 0,backend TEXT 0,name TEXT 0,payload TEXT 0,detail TEXT 0";
 constexpr std::string_view kStateColumns = "name TEXT 1,value INTEGER 0";
 
+constexpr const char* kForeignTables = "its tables are not those of a recorder";
+
 constexpr const char* kReadEventColumns =
     "SELECT group_concat(name || ' ' || type || ' ' || pk) FROM (SELECT * FROM pragma_table_info('events') ORDER BY "
     "cid)";
@@ -102,6 +104,26 @@ Status checkPages(Connection& connection) {
   return Error{SQLITE_CORRUPT, "damaged: " + verdict.value};
 }
 
+Status checkColumns(Connection& connection, bool& hasState) {
+  const Result<std::string> events = connection.readText(kReadEventColumns);
+  if (events.failed()) return events.error;
+  const Result<std::string> state = connection.readText(kReadStateColumns);
+  if (state.failed()) return state.error;
+  hasState = !state.value.empty();
+  if (events.value == kEventColumns && (!hasState || state.value == kStateColumns)) return {};
+  return Error{SQLITE_MISMATCH, kForeignTables};
+}
+
+Status checkNotes(Connection& connection) {
+  const Result<std::int64_t> notes = connection.readInteger(
+      "SELECT count(*) FROM sqlite_schema WHERE type = 'table' AND tbl_name = name AND "
+      "name IN ('recorder_state', 'event_groups', 'recorder_losses', 'recorder_times')");
+  if (notes.failed()) return notes.error;
+  // A file of an older recorder has its state at the most.
+  if (notes.value == 4 || notes.value <= 1) return {};
+  return Error{SQLITE_MISMATCH, "one of its tables is missing"};
+}
+
 Status checkTables(Connection& connection, std::int64_t lastId, bool& made) {
   Statement kinds;
   int code = kinds.prepare(connection.handle(),
@@ -117,19 +139,13 @@ Status checkTables(Connection& connection, std::int64_t lastId, bool& made) {
   made = !hasAny;
   if (made) return makeTables(connection, lastId);
 
-  const Result<std::string> events = connection.readText(kReadEventColumns);
-  if (events.failed()) return events.error;
-  const Result<std::string> state = connection.readText(kReadStateColumns);
-  if (state.failed()) return state.error;
-  const bool fits = !hasViews && events.value == kEventColumns;
-  if (!fits || (!state.value.empty() && state.value != kStateColumns)) {
-    return Error{SQLITE_MISMATCH, "its tables are not those of a recorder"};
-  }
+  if (hasViews) return Error{SQLITE_MISMATCH, kForeignTables};
+  bool hasState = false;
+  if (Status columns = checkColumns(connection, hasState); columns.failed()) return columns;
   const Result<std::int64_t> notes = connection.readInteger(
       "SELECT count(*) FROM sqlite_schema "
       "WHERE name IN ('event_groups', 'recorder_losses', 'recorder_times') AND type = 'table'");
   if (notes.failed()) return notes.error;
-  const bool hasState = !state.value.empty();
   return hasState && notes.value == 3 ? Status() : addNotes(connection, hasState);
 }
 

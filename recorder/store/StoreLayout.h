@@ -13,6 +13,10 @@ namespace tarn::recorder {
 [[nodiscard]] Status prepareConnection(Connection& connection);
 // Reads the whole file. A page that can't be read is no damage: the error is then that of the reading.
 [[nodiscard]] Status checkPages(Connection& connection);
+// Whether the events, and the recorder's state where it has any, have the columns that a recorder makes.
+[[nodiscard]] Status checkColumns(Connection& connection, bool& hasState);
+// Whether the recorder's notes are there whole, where they were ever made.
+[[nodiscard]] Status checkNotes(Connection& connection);
 // Makes the tables where there are none, and says so; ids of a fresh file go on after `lastId`.
 [[nodiscard]] Status checkTables(Connection& connection, std::int64_t lastId, bool& made);
 // The greatest id that the file has given to an event.

@@ -44,6 +44,14 @@ Result<StoreReport> inspectStore(const std::filesystem::path& file) {
     if (remedyFor(error->code) != Remedy::SetAside) return {{}, error};
     report.damage = error->text;
   }
+  // No checksum holds the text that makes the tables what they are.
+  bool hasState = false;
+  if (auto error = checkColumns(connection, hasState); error.failed() && report.damage.empty()) {
+    report.damage = error->text;
+  }
+  if (auto error = checkNotes(connection); error.failed() && report.damage.empty()) {
+    report.damage = error->text;
+  }
   StoreCheck check(connection);
   check.tolerateDamage();
   Status error = check.begin();

@@ -137,6 +137,15 @@ TEST_F(RecorderDamage, AFlippedBitIsSeenOrHarmless) {
   }
 }
 
+TEST_F(RecorderDamage, ATableUnderAnotherNameIsSeen) {
+  start();
+  recordMany(10);
+  stop();
+  replaceInFile(file(), "tablerecorder_state", "tablebecorder_state");
+  const auto inspected = inspectStore(file());
+  EXPECT_TRUE(inspected.failed() || !inspected.value.isWhole());
+}
+
 TEST_F(RecorderDamage, ARunningRecorderFindsAChangedRowAndCarriesTheRestOver) {
   start();
   recordMany(1000);
