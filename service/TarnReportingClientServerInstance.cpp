@@ -6,8 +6,9 @@
 #include "platform/ProcessControl.h"
 #include "platform/TracePoints.h"
 #include "platform/WorkQueue.h"
-#include "service/TarnReportingServiceDelegateProtocol.h"
-#include "service/TarnReportingSessionIndex.h"
+#include "service/TarnReportingMessageDelivery.h"
+#include "service/TarnReportingSessionListing.h"
+#include "service/TarnReportingSlices.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
 #include "service/vocabulary/TarnReportingServerQueue.h"
@@ -21,21 +22,16 @@ namespace {
 
 constexpr std::string_view kModule = "TarnReportingClientServerInstance";
 constexpr TarnReportingLogger kLog{TarnReportingClientCategory, kModule};
-constexpr std::string_view kErrorDomain = "sys.oxbow.audio.reporting";
-constexpr std::int64_t kReportingDisabled = 1;
 constexpr int kKilledExitStatus = 2;
 
 constexpr std::uint32_t kTraceCreate = 0x21044814;
 constexpr std::uint32_t kTraceStart = 0x21044818;
 constexpr std::uint32_t kTraceStop = 0x2104481C;
-constexpr std::uint32_t kTraceSend = 0x21044824;
 
 // What long work costs, in units of about a microsecond.
-constexpr std::size_t kDeliveryCost = 2;
 constexpr std::size_t kStopCost = 32;
 constexpr std::size_t kMessagesPerStopCost = 2;  // of the stopped session's log
 constexpr std::size_t kRemovalsAtOnce = 4;       // sessions that are released in a unit's time and some
-constexpr std::size_t kListedAtOnce = 64;        // IDs that are listed in one
 
 void trace(std::uint32_t code, std::int64_t reporterID) {
   TarnReportingFacilities().tracePoints.emit(code, reporterID);
@@ -50,15 +46,6 @@ void onServerQueue(platform::Work work) {
   TarnReportingUtilityGetReportingServerQueue()->async(std::move(work));
 }
 
-// Whether others are to have their turn before work goes on that has cost so much more.
-bool spend(std::size_t cost) {
-  return TarnReportingUtilityGetReportingServerQueue()->spend(cost);
-}
-
-void continueLater(platform::Work rest) {
-  TarnReportingUtilityGetReportingServerQueue()->asyncNext(std::move(rest));
-}
-
 // Sends the reply that a start call left with the session, if there is one.
 void sendHeldReply(TarnReportingSession& session) {
   if (platform::Acknowledge held = std::move(session.transactionCompleteBlock())) {
@@ -66,49 +53,7 @@ void sendHeldReply(TarnReportingSession& session) {
   }
 }
 
-plist::ValueView textOf(const platform::ReporterIDs& reporterIDs, plist::Array& storage) {
-  if (!reporterIDs) return {};
-  for (const std::int64_t reporterID : *reporterIDs) {
-    storage.append(reporterID);
-  }
-  return storage;
-}
-
-// What became of a record that so many workers got.
-TarnReportingOutcome outcomeOf(const TarnReportingSessionMessage& record, std::size_t workers) {
-  if (record.isRedundant()) return TarnReportingOutcome::Redundant;
-  return workers != 0 ? TarnReportingOutcome::Delivered : TarnReportingOutcome::Unwanted;
-}
-
-// The better of two sessions' outcomes of one message.
-void improve(TarnReportingOutcome& outcome, TarnReportingOutcome another) {
-  outcome = std::min(outcome, another);
-}
-
 }  // namespace
-
-// A message on its way to its sessions.
-struct TarnReportingClientServerInstance::Delivery {
-  plist::Dictionary message;
-  std::uint32_t category;
-  std::uint16_t type;
-  platform::Reply<> reply;
-  TarnReportingServiceDelegateProtocol::SessionSearch search;
-  bool found = false;    // the search is over
-  bool gaveWay = false;  // others' work was done since then
-  std::size_t next = 0;  // of the sessions that were found
-  TarnReportingOutcome outcome = TarnReportingOutcome::WithoutSession;
-
-  bool toWhoeverRuns() const { return !search.reporterIDs || search.reporterIDs->empty(); }
-};
-
-// The listing of all reporter IDs.
-struct TarnReportingClientServerInstance::Listing {
-  platform::Reply<std::vector<std::int64_t>> reply;
-  std::vector<std::int64_t> reporters;
-  std::uint64_t client = 0;                 // the number of the one whose sessions are listed
-  TarnReportingSessionMap::Place from = 0;  // among its sessions
-};
 
 std::shared_ptr<TarnReportingClientServerInstance> TarnReportingClientServerInstance::initWithPID(
     std::int32_t processIdentifier, std::weak_ptr<TarnReportingServiceDelegateProtocol> delegate) {
@@ -127,9 +72,6 @@ TarnReportingClientServerInstance::TarnReportingClientServerInstance(
 
 TarnReportingClientServerInstance::~TarnReportingClientServerInstance() {
   kLog(LogLevel::Default, "dealloc %i from the server client list", processIdentifier_);
-  while (const auto session = sessions_.first()) {
-    removeSession(session->reporterID());
-  }
 }
 
 void TarnReportingClientServerInstance::createReportingSession(std::int64_t reporterID, platform::Acknowledge reply) {
@@ -190,10 +132,10 @@ void TarnReportingClientServerInstance::sendMessage(plist::Dictionary message, s
     }
   }
   onServerQueue([self = shared_from_this(),
-                 delivery = Delivery{
-                     std::move(message), category, type, std::move(reply), {std::move(reporterIDs), {}}}]() mutable {
-    const auto signpost = operation("sendMessage", {"category", delivery.category});
-    self->beginToSend(delivery);
+                 delivery = TarnReportingMessageDelivery(std::move(message), category, type, std::move(reporterIDs),
+                                                         std::move(reply))]() mutable {
+    const auto signpost = operation("sendMessage", {"category", delivery.category()});
+    delivery.begin(self->processIdentifier_, self->delegate_);
   });
 }
 
@@ -226,10 +168,9 @@ void TarnReportingClientServerInstance::reporterID(std::int64_t reporterID, plat
 }
 
 void TarnReportingClientServerInstance::getAllReporters(platform::Reply<std::vector<std::int64_t>> reply) {
-  onServerQueue([self = shared_from_this(), reply = std::move(reply)]() mutable {
+  onServerQueue([self = shared_from_this(), listing = TarnReportingSessionListing(std::move(reply))]() mutable {
     const auto signpost = operation("getAllReporters");
-    Listing listing{std::move(reply), {}};
-    self->continueListing(listing);
+    listing.proceed(self->delegate_);
   });
 }
 
@@ -266,52 +207,16 @@ std::shared_ptr<TarnReportingSession> TarnReportingClientServerInstance::makeSes
   return session;
 }
 
-void TarnReportingClientServerInstance::setSessionIndex(std::shared_ptr<TarnReportingSessionIndex> index,
-                                                        std::uint64_t number) {
-  index_ = std::move(index);
-  number_ = number;
+void TarnReportingClientServerInstance::listSessions(std::shared_ptr<TarnReportingSessionIndex> index,
+                                                     std::uint64_t number) {
   // A platform may deliver requests before the service's own work lists the client.
-  sessions_.forEach([this](std::int64_t reporterID, const std::shared_ptr<TarnReportingSession>&) {
-    index_->add(reporterID, number_, *this);
-  });
-  index_->addRunning(static_cast<std::ptrdiff_t>(sessions_.runningCount()));
-}
-
-void TarnReportingClientServerInstance::storeSession(std::int64_t reporterID,
-                                                     std::shared_ptr<TarnReportingSession> session) {
-  const std::size_t running = sessions_.runningCount();
-  const bool isNew = sessions_.store(reporterID, std::move(session));
-  if (index_ != nullptr) {
-    index_->addRunning(static_cast<std::ptrdiff_t>(sessions_.runningCount() - running));
-    if (isNew) {
-      index_->add(reporterID, number_, *this);
-    }
-  }
-}
-
-void TarnReportingClientServerInstance::removeSession(std::int64_t reporterID) {
-  const auto session = sessions_.find(reporterID);
-  if (session == nullptr) return;
-  const std::size_t running = sessions_.runningCount();
-  sessions_.remove(reporterID);
-  if (index_ != nullptr) {
-    index_->addRunning(static_cast<std::ptrdiff_t>(sessions_.runningCount() - running));
-    index_->remove(reporterID, number_);
-  }
-}
-
-void TarnReportingClientServerInstance::noteRunning(const TarnReportingSession& session) {
-  const std::size_t running = sessions_.runningCount();
-  sessions_.setRunning(session.reporterID(), session.started());
-  if (index_ != nullptr) {
-    index_->addRunning(static_cast<std::ptrdiff_t>(sessions_.runningCount() - running));
-  }
+  sessions_.list(std::move(index), number, *this);
 }
 
 void TarnReportingClientServerInstance::stopSession(TarnReportingSession& session) {
-  spend(session.messages().size() / kMessagesPerStopCost);
+  TarnReportingSpend(session.messages().size() / kMessagesPerStopCost);
   session.stop();
-  noteRunning(session);
+  sessions_.setRunning(session.reporterID(), session.started());
 }
 
 void TarnReportingClientServerInstance::logReportingSessions() {
@@ -323,7 +228,7 @@ void TarnReportingClientServerInstance::logReportingSessions() {
 void TarnReportingClientServerInstance::create(std::int64_t reporterID) {
   kLog(LogLevel::Default, "creating session for reporter %lli", reporterID);
   trace(kTraceCreate, reporterID);
-  storeSession(reporterID, makeSession(reporterID));
+  sessions_.store(reporterID, makeSession(reporterID));
   kLog(LogLevel::Default, "session created for reporter %lli", reporterID);
 }
 
@@ -339,7 +244,7 @@ void TarnReportingClientServerInstance::retype(std::uint16_t serviceType, std::i
     replacement->updateConfigurationWithContentsOfConfiguration(&session->configuration());
     replacement->previousValues().merge(session->previousValues());
     replacement->setServiceType(type);
-    storeSession(reporterID, replacement);
+    sessions_.store(reporterID, replacement);
   }
   kLog(LogLevel::Default, "service type %i set for reporter  %lli", serviceType, reporterID);
 }
@@ -356,7 +261,7 @@ void TarnReportingClientServerInstance::start(std::int64_t reporterID, platform:
     return;  // the reply of the first start stands for both
   }
   session->start();
-  noteRunning(*session);
+  sessions_.setRunning(reporterID, session->started());
   sendHeldReply(*session);
   session->transactionCompleteBlock() = std::move(reply);
   if (session->serviceType() == AudioServiceType::Test && TarnReportingUtilityIsInternalBuild()) {
@@ -389,86 +294,9 @@ void TarnReportingClientServerInstance::destroy(std::int64_t reporterID) {
   if (const auto session = sessions_.find(reporterID); session && session->started()) {
     stopSession(*session);
   }
-  removeSession(reporterID);
+  sessions_.remove(reporterID);
   kLog(LogLevel::Default, "destroying %lli", reporterID);
   logReportingSessions();
-}
-
-void TarnReportingClientServerInstance::beginToSend(Delivery& delivery) {
-  plist::Array storage;
-  kLog(LogLevel::Debug, "sending message for reporter %@",
-       [&] { return textOf(delivery.search.reporterIDs, storage); });
-  trace(kTraceSend, processIdentifier_);
-  const auto service = delegate_.lock();
-  if (!service || !service->isReportingEnabled()) {
-    if (service) {
-      service->countMessage(TarnReportingOutcome::Refused);
-    }
-    delivery.reply(platform::RemoteError{kErrorDomain, kReportingDisabled, "reporting is disabled"});
-    return;
-  }
-  continueSending(delivery);
-}
-
-void TarnReportingClientServerInstance::continueSending(Delivery& delivery) {
-  const auto service = delegate_.lock();
-  if (!service) return;
-  const auto giveWay = [&] {
-    delivery.gaveWay = delivery.found;
-    continueLater(
-        [self = shared_from_this(), delivery = std::move(delivery)]() mutable { self->continueSending(delivery); });
-  };
-  delivery.found = delivery.found || service->findNextSessions(delivery.search);
-  if (!delivery.found) {
-    giveWay();
-    return;
-  }
-  auto& sessions = delivery.search.found;
-  while (delivery.next < sessions.size()) {
-    const std::shared_ptr<TarnReportingSession> session = std::move(sessions[delivery.next++]);
-    const bool isLast = delivery.next == sessions.size();
-    if (delivery.gaveWay && delivery.toWhoeverRuns() && !session->started()) {
-      improve(delivery.outcome, TarnReportingOutcome::Undeliverable);  // it was stopped meanwhile
-    } else {
-      // Each session changes its own; the last one, mostly the only one, needs no copy for it.
-      const auto record = std::make_shared<TarnReportingSessionMessage>(
-          isLast ? std::move(delivery.message) : delivery.message, static_cast<AudioEventCategory>(delivery.category),
-          static_cast<AudioEventType>(delivery.type));
-      improve(delivery.outcome, outcomeOf(*record, session->sendMessage(record)));
-    }
-    if (!isLast && spend(kDeliveryCost)) {
-      giveWay();
-      return;
-    }
-  }
-  service->countMessage(delivery.outcome);
-  delivery.reply(std::nullopt);
-}
-
-void TarnReportingClientServerInstance::continueListing(Listing& listing) {
-  const auto service = delegate_.lock();
-  if (!service) {
-    listing.reply(std::nullopt, {});
-    return;
-  }
-  const auto& clients = service->sessionIndex().clients();
-  for (auto entry = clients.lower_bound(listing.client); entry != clients.end(); ++entry) {
-    if (entry->first != listing.client) {
-      listing.client = entry->first;
-      listing.from = 0;
-    }
-    const bool whole = entry->second->sessions_.forEachFrom(listing.from, [&](std::int64_t reporterID) {
-      listing.reporters.push_back(reporterID);
-      return listing.reporters.size() % kListedAtOnce != 0 || !spend(1);
-    });
-    if (!whole) {
-      continueLater(
-          [self = shared_from_this(), listing = std::move(listing)]() mutable { self->continueListing(listing); });
-      return;
-    }
-  }
-  spend(listing.reporters.size() / kListedAtOnce);  // what the reply takes
-  listing.reply(std::nullopt, std::move(listing.reporters));
 }
 
 void TarnReportingClientServerInstance::endClient() {
@@ -485,20 +313,20 @@ void TarnReportingClientServerInstance::endClient() {
   const auto rest = [self = shared_from_this()] { self->endClient(); };
   while (const auto session = sessions_.firstRunning()) {
     stopSession(*session);
-    if (sessions_.size() > 1 && spend(kStopCost)) {
-      continueLater(rest);
+    if (sessions_.size() > 1 && TarnReportingSpend(kStopCost)) {
+      TarnReportingContinueLater(rest);
       return;
     }
   }
   while (const auto session = sessions_.first()) {
-    removeSession(session->reporterID());
-    if (sessions_.size() % kRemovalsAtOnce == 1 && spend(kRemovalsAtOnce)) {
-      continueLater(rest);
+    sessions_.remove(session->reporterID());
+    if (sessions_.size() % kRemovalsAtOnce == 1 && TarnReportingSpend(kRemovalsAtOnce)) {
+      TarnReportingContinueLater(rest);
       return;
     }
   }
   service->removeClient(*this);
-  index_ = nullptr;  // sessions that it still makes are for nobody else to find
+  sessions_.unlist();
   kLog(LogLevel::Default, "removing %i from the server client list", processIdentifier_);
 }
 

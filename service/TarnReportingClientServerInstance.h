@@ -58,19 +58,13 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
   // Empty while it is not known; set by the service.
   const std::string& clientProcessName() const noexcept { return clientProcessName_; }
   void setClientProcessName(std::string name) { clientProcessName_ = std::move(name); }
-  // What the client's sessions are told to, and the client's number in it; set by the service, once.
-  void setSessionIndex(std::shared_ptr<TarnReportingSessionIndex> index, std::uint64_t number);
+  // Lists the client's sessions in the index under the client's number; by the service, once.
+  void listSessions(std::shared_ptr<TarnReportingSessionIndex> index, std::uint64_t number);
 
  private:
-  struct Delivery;
-  struct Listing;
-
   TarnReportingClientServerInstance(std::int32_t processIdentifier,
                                     std::weak_ptr<TarnReportingServiceDelegateProtocol> delegate);
   std::shared_ptr<TarnReportingSession> makeSession(std::int64_t reporterID);
-  void storeSession(std::int64_t reporterID, std::shared_ptr<TarnReportingSession> session);
-  void removeSession(std::int64_t reporterID);
-  void noteRunning(const TarnReportingSession& session);
   // Stops the session and charges what that costs.
   void stopSession(TarnReportingSession& session);
   void logReportingSessions();
@@ -81,10 +75,7 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
   void start(std::int64_t reporterID, platform::Acknowledge reply);
   void stop(std::int64_t reporterID);
   void destroy(std::int64_t reporterID);
-  // Those of the long ones go on until they are done or others are to have their turn, and then hand over the rest.
-  void beginToSend(Delivery& delivery);
-  void continueSending(Delivery& delivery);
-  void continueListing(Listing& listing);
+  // Goes on until it is done or others are to have their turn, and then hands over the rest.
   void endClient();
 
   const std::int32_t processIdentifier_;
@@ -94,8 +85,6 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
   std::optional<double> clientStartDate_;
   std::string clientProcessName_;
   TarnReportingSessionMap sessions_;
-  std::shared_ptr<TarnReportingSessionIndex> index_;
-  std::uint64_t number_ = 0;  // in the index
   bool endTold_ = false;
 };
 

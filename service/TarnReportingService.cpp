@@ -10,6 +10,7 @@
 #include "platform/TallyService.h"
 #include "platform/WorkQueue.h"
 #include "service/TarnReportingClientServerInstance.h"
+#include "service/TarnReportingSlices.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
 #include "service/vocabulary/TarnReportingServerQueue.h"
@@ -117,7 +118,7 @@ bool TarnReportingService::listenerShouldAcceptNewConnection(const std::shared_p
     client->setClientStartDate(TarnReportingFacilities().clock.epochSeconds());
     client->setClientProcessName(TarnReportingFacilities().processFacts.processName(processIdentifier).value_or(""));
     const MutexLock lock(self->mutex_);
-    client->setSessionIndex(self->index_, self->nextClientNumber_++);
+    client->listSessions(self->index_, self->nextClientNumber_++);
     self->clients_.push_back(client);
   });
   const std::weak_ptr<TarnReportingClientServerInstance> weakClient = client;
@@ -229,10 +230,7 @@ bool TarnReportingService::findNextSessions(SessionSearch& search) {
   const std::vector<std::int64_t>& reporterIDs = *search.reporterIDs;
   while (search.next < reporterIDs.size()) {
     findListed(search, reporterIDs[search.next++]);
-    if (search.next % kLookUpsAtOnce == 0 && search.next < reporterIDs.size() &&
-        TarnReportingUtilityGetReportingServerQueue()->spend(1)) {
-      return false;
-    }
+    if (search.next % kLookUpsAtOnce == 0 && search.next < reporterIDs.size() && TarnReportingSpend(1)) return false;
   }
   if (search.unknown > kMostUnknownListed) {
     kLog(LogLevel::Error, "failed to find %ld more reporting sessions", search.unknown - kMostUnknownListed);

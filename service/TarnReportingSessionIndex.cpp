@@ -1,22 +1,27 @@
 #include "service/TarnReportingSessionIndex.h"
 
+#include <algorithm>
+
 namespace tarn {
 
 void TarnReportingSessionIndex::add(std::int64_t reporterID, std::uint64_t number, Client& client) {
-  holders_.emplace(reporterID, Holder{number, &client});
+  auto& holders = holders_[reporterID];
+  const auto place = std::find_if(holders.rbegin(), holders.rend(), [&](const Holder& h) { return h.number < number; });
+  holders.insert(place.base(), Holder{number, &client});
+  ++sessionCount_;
   if (++sessionsOf_[number] == 1) {
     clients_.emplace(number, &client);
   }
 }
 
 void TarnReportingSessionIndex::remove(std::int64_t reporterID, std::uint64_t number) {
-  const auto [begin, end] = holders_.equal_range(reporterID);
-  for (auto holder = begin; holder != end; ++holder) {
-    if (holder->second.number == number) {
-      holders_.erase(holder);
-      break;
-    }
+  const auto entry = holders_.find(reporterID);
+  if (entry == holders_.end()) return;
+  if (std::erase_if(entry->second, [&](const Holder& holder) { return holder.number == number; }) == 0) return;
+  if (entry->second.empty()) {
+    holders_.erase(entry);
   }
+  --sessionCount_;
   if (const auto count = sessionsOf_.find(number); count != sessionsOf_.end() && --count->second == 0) {
     sessionsOf_.erase(count);
     clients_.erase(number);
@@ -24,14 +29,8 @@ void TarnReportingSessionIndex::remove(std::int64_t reporterID, std::uint64_t nu
 }
 
 TarnReportingSessionIndex::Client* TarnReportingSessionIndex::firstHolder(std::int64_t reporterID) const {
-  const auto [begin, end] = holders_.equal_range(reporterID);
-  const Holder* first = nullptr;
-  for (auto holder = begin; holder != end; ++holder) {
-    if (first == nullptr || holder->second.number < first->number) {
-      first = &holder->second;
-    }
-  }
-  return first == nullptr ? nullptr : first->client;
+  const auto entry = holders_.find(reporterID);
+  return entry == holders_.end() ? nullptr : entry->second.front().client;
 }
 
 }  // namespace tarn

@@ -11,6 +11,7 @@
 #include <cstdint>
 #include <map>
 #include <unordered_map>
+#include <vector>
 
 namespace tarn {
 
@@ -36,7 +37,7 @@ class TarnReportingSessionIndex {
   Client* firstHolder(std::int64_t reporterID) const;
   // Those that have sessions.
   const Clients& clients() const noexcept { return clients_; }
-  std::size_t sessionCount() const noexcept { return holders_.size(); }
+  std::size_t sessionCount() const noexcept { return sessionCount_; }
   std::size_t runningCount() const noexcept { return running_; }
 
  private:
@@ -45,9 +46,11 @@ class TarnReportingSessionIndex {
     Client* client;
   };
 
-  std::unordered_multimap<std::int64_t, Holder> holders_;
+  // In the order of the clients. Mostly one; but a thousand clients may all number their sessions from 1.
+  std::unordered_map<std::int64_t, std::vector<Holder>> holders_;
   std::unordered_map<std::uint64_t, std::size_t> sessionsOf_;
   Clients clients_;
+  std::size_t sessionCount_ = 0;
   std::size_t running_ = 0;
 };
 

@@ -1,5 +1,6 @@
 #include "service/TarnReportingSessionMap.h"
 
+#include "service/TarnReportingSessionIndex.h"
 #include "session/TarnReportingSession.h"
 
 namespace tarn {
@@ -9,31 +10,59 @@ TarnReportingSessionMap::Session TarnReportingSessionMap::find(std::int64_t repo
   return place == places_.end() ? nullptr : ordered_.at(place->second).session;
 }
 
-bool TarnReportingSessionMap::store(std::int64_t reporterID, Session session) {
+TarnReportingSessionMap::~TarnReportingSessionMap() {
+  while (const Session session = first()) {
+    remove(session->reporterID());
+  }
+}
+
+void TarnReportingSessionMap::list(std::shared_ptr<TarnReportingSessionIndex> index, std::uint64_t number,
+                                   TarnReportingClientServerInstance& client) {
+  index_ = std::move(index);
+  number_ = number;
+  client_ = &client;
+  for (const auto& [place, entry] : ordered_) {
+    index_->add(entry.reporterID, number_, *client_);
+  }
+  noteRunning(static_cast<std::ptrdiff_t>(running_.size()));
+}
+
+void TarnReportingSessionMap::store(std::int64_t reporterID, Session session) {
   const auto [place, isNew] = places_.try_emplace(reporterID, nextPlace_);
   if (isNew) {
     ++nextPlace_;
+    if (index_ != nullptr) {
+      index_->add(reporterID, number_, *client_);
+    }
   }
-  running_.erase(place->second);
+  noteRunning(-static_cast<std::ptrdiff_t>(running_.erase(place->second)));
   ordered_.insert_or_assign(place->second, Entry{reporterID, std::move(session)});
-  return isNew;
 }
 
 void TarnReportingSessionMap::remove(std::int64_t reporterID) {
-  if (const auto place = places_.find(reporterID); place != places_.end()) {
-    running_.erase(place->second);
-    ordered_.erase(place->second);
-    places_.erase(place);
+  const auto place = places_.find(reporterID);
+  if (place == places_.end()) return;
+  noteRunning(-static_cast<std::ptrdiff_t>(running_.erase(place->second)));
+  if (index_ != nullptr) {
+    index_->remove(reporterID, number_);
   }
+  const auto removed = ordered_.extract(place->second);  // ends when nothing finds it any more
+  places_.erase(place);
 }
 
 void TarnReportingSessionMap::setRunning(std::int64_t reporterID, bool running) {
   const auto place = places_.find(reporterID);
   if (place == places_.end()) return;
-  if (running) {
-    running_.emplace(place->second, &ordered_.at(place->second));
-  } else {
-    running_.erase(place->second);
+  if (!running) {
+    noteRunning(-static_cast<std::ptrdiff_t>(running_.erase(place->second)));
+  } else if (running_.emplace(place->second, &ordered_.at(place->second)).second) {
+    noteRunning(1);
+  }
+}
+
+void TarnReportingSessionMap::noteRunning(std::ptrdiff_t more) noexcept {
+  if (index_ != nullptr) {
+    index_->addRunning(more);
   }
 }
 

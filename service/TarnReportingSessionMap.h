@@ -4,6 +4,8 @@
 // all of them goes by the order of creation, so that the same run always does the same in the same order. Those that
 // run are known by themselves: a hundred thousand that don't are not gone through to find the one that does.
 //
+// Once it is listed it keeps the index of all clients' sessions in step.
+//
 // Threads: the server queue.
 #pragma once
 
@@ -15,7 +17,9 @@
 
 namespace tarn {
 
+class TarnReportingClientServerInstance;
 class TarnReportingSession;
+class TarnReportingSessionIndex;
 
 class TarnReportingSessionMap {
  public:
@@ -23,11 +27,23 @@ class TarnReportingSessionMap {
   // A place in the order of creation.
   using Place = std::uint64_t;
 
+  TarnReportingSessionMap() = default;
+  TarnReportingSessionMap(const TarnReportingSessionMap&) = delete;
+  TarnReportingSessionMap& operator=(const TarnReportingSessionMap&) = delete;
+  // Removes the sessions one by one, in order.
+  ~TarnReportingSessionMap();
+
+  // Tells the index what there is and from now on what changes, as the sessions of this client with this number in it.
+  void list(std::shared_ptr<TarnReportingSessionIndex> index, std::uint64_t number,
+            TarnReportingClientServerInstance& client);
+  // Nobody else finds what is stored from now on. The map is empty.
+  void unlist() noexcept { index_ = nullptr; }
+
   // The session under this ID, or nothing.
   Session find(std::int64_t reporterID) const;
   // Stores the session under this ID, as one that doesn't run; one that is there already is dropped and gives it its
-  // place. Whether the ID is new.
-  bool store(std::int64_t reporterID, Session session);
+  // place.
+  void store(std::int64_t reporterID, Session session);
   void remove(std::int64_t reporterID);
   // Notes that the session under this ID was started or stopped.
   void setRunning(std::int64_t reporterID, bool running);
@@ -69,10 +85,16 @@ class TarnReportingSessionMap {
     Session session;
   };
 
+  void noteRunning(std::ptrdiff_t more) noexcept;
+
   std::map<Place, Entry> ordered_;
   std::map<Place, const Entry*> running_;
   std::unordered_map<std::int64_t, Place> places_;
   Place nextPlace_ = 0;
+
+  std::shared_ptr<TarnReportingSessionIndex> index_;  // null: not listed
+  TarnReportingClientServerInstance* client_ = nullptr;
+  std::uint64_t number_ = 0;  // in the index
 };
 
 }  // namespace tarn

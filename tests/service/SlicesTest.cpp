@@ -198,7 +198,7 @@ TEST_F(Slices, SessionsThatAreThereBeforeTheirClientIsListedAreFoundLater) {
   early->createReportingSession(500, [](const std::optional<platform::RemoteError>&, bool) {});
   platform_.runUntilIdle();
   EXPECT_EQ(service_->findReportingSessionForID(500), nullptr);
-  early->setSessionIndex(std::shared_ptr<TarnReportingSessionIndex>(std::shared_ptr<void>(), index), 900);
+  early->listSessions(std::shared_ptr<TarnReportingSessionIndex>(std::shared_ptr<void>(), index), 900);
   EXPECT_NE(service_->findReportingSessionForID(500), nullptr);
   EXPECT_EQ(service_->sessionCount(), 1U);
 }

@@ -1,0 +1,98 @@
+#include "service/TarnReportingMessageDelivery.h"
+
+#include <algorithm>
+
+#include "platform/Facilities.h"
+#include "platform/TracePoints.h"
+#include "service/TarnReportingSlices.h"
+#include "service/vocabulary/TarnReportingLog.h"
+#include "service/vocabulary/TarnReportingPlatform.h"
+#include "session/TarnReportingSession.h"
+
+namespace tarn {
+
+namespace {
+
+constexpr TarnReportingLogger kLog{TarnReportingClientCategory, "TarnReportingClientServerInstance"};
+constexpr std::string_view kErrorDomain = "sys.oxbow.audio.reporting";
+constexpr std::int64_t kReportingDisabled = 1;
+constexpr std::uint32_t kTraceSend = 0x21044824;
+// Of handing a message to a session, in units of about a microsecond.
+constexpr std::size_t kDeliveryCost = 2;
+
+plist::ValueView textOf(const platform::ReporterIDs& reporterIDs, plist::Array& storage) {
+  if (!reporterIDs) return {};
+  for (const std::int64_t reporterID : *reporterIDs) {
+    storage.append(reporterID);
+  }
+  return storage;
+}
+
+// What became of a record that so many workers got.
+TarnReportingOutcome outcomeOf(const TarnReportingSessionMessage& record, std::size_t workers) {
+  if (record.isRedundant()) return TarnReportingOutcome::Redundant;
+  return workers != 0 ? TarnReportingOutcome::Delivered : TarnReportingOutcome::Unwanted;
+}
+
+// The better of two sessions' outcomes of one message.
+void improve(TarnReportingOutcome& outcome, TarnReportingOutcome another) {
+  outcome = std::min(outcome, another);
+}
+
+}  // namespace
+
+void TarnReportingMessageDelivery::begin(std::int32_t processIdentifier,
+                                         std::weak_ptr<TarnReportingServiceDelegateProtocol> service) {
+  plist::Array storage;
+  kLog(LogLevel::Debug, "sending message for reporter %@", [&] { return textOf(search_.reporterIDs, storage); });
+  TarnReportingFacilities().tracePoints.emit(kTraceSend, processIdentifier);
+  if (const auto delegate = service.lock(); !delegate || !delegate->isReportingEnabled()) {
+    if (delegate) {
+      delegate->countMessage(TarnReportingOutcome::Refused);
+    }
+    reply_(platform::RemoteError{kErrorDomain, kReportingDisabled, "reporting is disabled"});
+    return;
+  }
+  proceed(service);
+}
+
+void TarnReportingMessageDelivery::proceed(const std::weak_ptr<TarnReportingServiceDelegateProtocol>& delegate) {
+  const auto service = delegate.lock();
+  if (!service) return;
+  found_ = found_ || service->findNextSessions(search_);
+  if (!found_) {
+    giveWay(delegate);
+    return;
+  }
+  auto& sessions = search_.found;
+  while (next_ < sessions.size()) {
+    const std::shared_ptr<TarnReportingSession> session = std::move(sessions[next_++]);
+    const bool isLast = next_ == sessions.size();
+    handOver(session, isLast);
+    if (!isLast && TarnReportingSpend(kDeliveryCost)) {
+      giveWay(delegate);
+      return;
+    }
+  }
+  service->countMessage(outcome_);
+  reply_(std::nullopt);
+}
+
+void TarnReportingMessageDelivery::giveWay(const std::weak_ptr<TarnReportingServiceDelegateProtocol>& delegate) {
+  gaveWay_ = found_;
+  TarnReportingContinueLater([delegate, rest = std::move(*this)]() mutable { rest.proceed(delegate); });
+}
+
+void TarnReportingMessageDelivery::handOver(const std::shared_ptr<TarnReportingSession>& session, bool isLast) {
+  if (gaveWay_ && isForWhoeverRuns() && !session->started()) {
+    improve(outcome_, TarnReportingOutcome::Undeliverable);  // it was stopped meanwhile
+    return;
+  }
+  // Each session changes its own; the last one, mostly the only one, needs no copy for it.
+  const auto record = std::make_shared<TarnReportingSessionMessage>(isLast ? std::move(message_) : message_,
+                                                                    static_cast<AudioEventCategory>(category_),
+                                                                    static_cast<AudioEventType>(type_));
+  improve(outcome_, outcomeOf(*record, session->sendMessage(record)));
+}
+
+}  // namespace tarn
