@@ -33,9 +33,9 @@ ConnectionRings::~ConnectionRings() {
   }
 }
 
-ConnectionRings::Opened ConnectionRings::open(std::vector<UniqueDescriptor> descriptors) {
+Result<std::uint64_t> ConnectionRings::open(std::vector<UniqueDescriptor> descriptors) {
   RingMemory memory;
-  if (const std::optional<RingFault> fault = check(descriptors, memory)) return refuse(*fault);
+  if (const std::optional<RingFault> fault = check(descriptors, memory)) return {0, refuse(*fault)};
   const auto reader = std::make_shared<RingReader>(std::move(memory), std::move(descriptors[1]),
                                                    static_cast<std::uint64_t>(board_.loop.clock().monotonic().count()),
                                                    [weak = weak_from_this()](RingReader& woken) {
@@ -44,7 +44,9 @@ ConnectionRings::Opened ConnectionRings::open(std::vector<UniqueDescriptor> desc
                                                      }
                                                    });
   // By the edge: nobody reads it, so it stays ready.
-  if (board_.loop.watch(reader->wakeDescriptor(), EPOLLIN | EPOLLET, reader).failed()) return refuse(RingFault::System);
+  if (board_.loop.watch(reader->wakeDescriptor(), EPOLLIN | EPOLLET, reader).failed()) {
+    return {0, refuse(RingFault::System)};
+  }
   reader->lastRecord = board_.loop.clock().monotonic();
   buffer_.resize(std::max<std::size_t>(buffer_.size(), reader->consumer().mostContent()));
   rings_.push_back(reader);
@@ -52,7 +54,7 @@ ConnectionRings::Opened ConnectionRings::open(std::vector<UniqueDescriptor> desc
   ++board_.counts.opened;
   board_.counts.bytesOpen += reader->bytes();
   board_.activate(shared_from_this());
-  return {nextNumber_++, {}};
+  return {nextNumber_++};
 }
 
 std::optional<RingFault> ConnectionRings::check(const std::vector<UniqueDescriptor>& descriptors,
@@ -65,7 +67,7 @@ std::optional<RingFault> ConnectionRings::check(const std::vector<UniqueDescript
   return board_.isOpen(memory.identity()) ? std::optional(RingFault::InUse) : std::nullopt;
 }
 
-ConnectionRings::Opened ConnectionRings::refuse(RingFault fault) {
+Error ConnectionRings::refuse(RingFault fault) {
   board_.counts.count(fault);
   const auto owner = owner_.lock();
   if (owner != nullptr && !std::exchange(refusalLogged_, true)) {
@@ -75,12 +77,13 @@ ConnectionRings::Opened ConnectionRings::refuse(RingFault fault) {
   return {0, std::string("openRing: ") + textOf(fault)};
 }
 
-std::string ConnectionRings::declareShape(const plist::Dictionary& description) {
-  std::string wrong = shapes_.declare(description);
+Status ConnectionRings::declareShape(const plist::Dictionary& description) {
+  const Status declared = shapes_.declare(description);
   if (!rings_.empty()) {
     board_.activate(shared_from_this());  // a message may have waited for it
   }
-  return wrong.empty() ? wrong : "declareShape: " + wrong;
+  if (declared.failed()) return Error{0, "declareShape: " + declared->text};
+  return {};
 }
 
 void ConnectionRings::end(Drained drained) {
@@ -214,8 +217,8 @@ ConnectionRings::Step ConnectionRings::serveFrame(RingReader& reader, RingOwner&
       break;
   }
   if (board_.request.operation == wire::Operation::DeclareShape) {
-    return shapes_.declare(board_.request.dictionary).empty() ? Step::Served
-                                                              : refuseRecord(reader, TARNRING_BAD_ARGUMENTS);
+    return shapes_.declare(board_.request.dictionary).ok() ? Step::Served
+                                                           : refuseRecord(reader, TARNRING_BAD_ARGUMENTS);
   }
   if (wire::rowOf(board_.request.operation).servedBy == wire::ServedBy::Host) {
     return refuseRecord(reader, TARNRING_UNKNOWN_OPERATION);

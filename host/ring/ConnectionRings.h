@@ -19,6 +19,7 @@
 #include "host/ring/RingReader.h"
 #include "host/ring/ShapeTable.h"
 #include "platform/UniqueFunction.h"
+#include "plist/Result.h"
 #include "wire/RequestDecoder.h"
 
 namespace tarn::linux_host {
@@ -49,13 +50,9 @@ class ConnectionRings : public std::enable_shared_from_this<ConnectionRings> {
   ConnectionRings& operator=(const ConnectionRings&) = delete;
   ~ConnectionRings();
 
-  // Takes the ring that these descriptors are; its number, or what is wrong.
-  struct Opened {
-    std::uint64_t number = 0;
-    std::string error;  // empty when it is open
-  };
-  Opened open(std::vector<UniqueDescriptor> descriptors);
-  [[nodiscard]] std::string declareShape(const plist::Dictionary& description);
+  // Takes the ring that these descriptors are; its number, from 1.
+  Result<std::uint64_t> open(std::vector<UniqueDescriptor> descriptors);
+  Status declareShape(const plist::Dictionary& description);
 
   // Reads what is published by now, then closes all rings and calls `drained`, which may be at once.
   void end(Drained drained);
@@ -72,7 +69,7 @@ class ConnectionRings : public std::enable_shared_from_this<ConnectionRings> {
   enum class Step : std::uint8_t { Served, Nothing, Held };
 
   std::optional<RingFault> check(const std::vector<UniqueDescriptor>& descriptors, RingMemory& memory) const;
-  Opened refuse(RingFault fault);
+  Error refuse(RingFault fault);
   bool serveRing(RingReader& reader, std::size_t& share);
   Step serveRecord(RingReader& reader, RingOwner& owner, std::size_t& share);
   Step serveMessage(RingReader& reader, RingOwner& owner, std::span<const std::byte> content);

@@ -99,13 +99,17 @@ bool isKnownMember(std::string_view name) {
   return std::find(kNames.begin(), kNames.end(), name) != kNames.end();
 }
 
+Status wrong(std::string text) {
+  return Error{0, std::move(text)};
+}
+
 }  // namespace
 
-std::string ShapeTable::declare(const plist::Dictionary& description) {
+Status ShapeTable::declare(const plist::Dictionary& description) {
   std::uint64_t number = 0;
-  if (!readNumber(description["shape"], TARNRING_MOST_SHAPES - 1, number)) return "shape: 0 to 1023 expected";
+  if (!readNumber(description["shape"], TARNRING_MOST_SHAPES - 1, number)) return wrong("shape: 0 to 1023 expected");
   for (const auto& entry : description) {
-    if (!isKnownMember(entry.key.text())) return "nothing is known by the name " + std::string(entry.key.text());
+    if (!isKnownMember(entry.key.text())) return wrong("nothing is known by the name " + std::string(entry.key.text()));
   }
   if (number >= shapes_.size()) {
     shapes_.resize(number + 1);
@@ -115,47 +119,47 @@ std::string ShapeTable::declare(const plist::Dictionary& description) {
     return {};
   }
   auto shape = std::make_unique<Shape>();
-  if (std::string wrong = read(description, *shape); !wrong.empty()) return wrong;
+  if (Status read = readShape(description, *shape); read.failed()) return read;
   shapes_[number] = std::move(shape);
   return {};
 }
 
-std::string ShapeTable::read(const plist::Dictionary& description, Shape& shape) {
+Status ShapeTable::readShape(const plist::Dictionary& description, Shape& shape) {
   std::uint64_t category = 0;
   std::uint64_t type = 0;
   if (!readNumber(description["category"], std::numeric_limits<std::uint32_t>::max(), category)) {
-    return "category: 0 to 4294967295 expected";
+    return wrong("category: 0 to 4294967295 expected");
   }
   if (!readNumber(description["type"], std::numeric_limits<std::uint16_t>::max(), type)) {
-    return "type: 0 to 65535 expected";
+    return wrong("type: 0 to 65535 expected");
   }
   shape.category = static_cast<std::uint32_t>(category);
   shape.type = static_cast<std::uint16_t>(type);
   if (!readReporterIDs(description["reporterIDs"], shape.reporterIDs)) {
-    return "reporterIDs: an array of at most 64 signed 64-bit integers expected";
+    return wrong("reporterIDs: an array of at most 64 signed 64-bit integers expected");
   }
   return readKeys(description, shape);
 }
 
-std::string ShapeTable::readKeys(const plist::Dictionary& description, Shape& shape) {
+Status ShapeTable::readKeys(const plist::Dictionary& description, Shape& shape) {
   if (description["keys"].kind() != plist::Kind::Array || description["kinds"].kind() != plist::Kind::Array) {
-    return "keys and kinds: arrays expected";
+    return wrong("keys and kinds: arrays expected");
   }
   const plist::Array keys = description["keys"].array();
   const plist::Array kinds = description["kinds"].array();
   if (keys.size() != kinds.size() || keys.size() > TARNRING_MOST_KEYS) {
-    return "keys and kinds: as many of each expected, at most 64";
+    return wrong("keys and kinds: as many of each expected, at most 64");
   }
   std::vector<std::string_view> names;
   for (const plist::ValueView& key : keys) {
     if (!key.isText() || key.text().size() > TARNRING_MOST_KEY_BYTES) {
-      return "keys: texts of at most 255 bytes expected";
+      return wrong("keys: texts of at most 255 bytes expected");
     }
     names.push_back(key.text());
   }
   for (const plist::ValueView& kind : kinds) {
     const auto* const found = std::find(kKindNames.begin(), kKindNames.end(), kind.isText() ? kind.text() : "");
-    if (found == kKindNames.end()) return "kinds: the name of a kind expected";
+    if (found == kKindNames.end()) return wrong("kinds: the name of a kind expected");
     shape.kinds.push_back(static_cast<ShapeKind>(found - kKindNames.begin()));
   }
   shape.addsStamp = std::find(names.begin(), names.end(), kStampKey) == names.end();
@@ -163,7 +167,7 @@ std::string ShapeTable::readKeys(const plist::Dictionary& description, Shape& sh
     names.push_back(kStampKey);
   }
   std::optional<plist::KeyList> list = plist::KeyList::make(names);
-  if (!list) return "keys: a key given twice";
+  if (!list) return wrong("keys: a key given twice");
   shape.keys = std::move(*list);
   return {};
 }

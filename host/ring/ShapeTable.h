@@ -17,6 +17,7 @@
 #include "clients/ring/RingLayout.h"
 #include "plist/KeyList.h"
 #include "plist/PackedBuilder.h"
+#include "plist/Result.h"
 #include "wire/Request.h"
 
 namespace tarn::linux_host {
@@ -30,9 +31,9 @@ class ShapeTable {
   ShapeTable(const ShapeTable&) = delete;
   ShapeTable& operator=(const ShapeTable&) = delete;
 
-  // Takes the shape that the dictionary describes, in place of one of the same number. What is wrong with it, or
-  // nothing.
-  [[nodiscard]] std::string declare(const plist::Dictionary& description);
+  // Takes the shape that the dictionary describes, in place of one of the same number. The error tells what is
+  // wrong with it.
+  Status declare(const plist::Dictionary& description);
 
   enum class Decoded { Ok, UnknownShape, BadValues };
   // The content of a message record as a request to send it; `request` counts when it is Ok.
@@ -48,8 +49,8 @@ class ShapeTable {
     bool addsStamp = false;
   };
 
-  static std::string read(const plist::Dictionary& description, Shape& shape);
-  static std::string readKeys(const plist::Dictionary& description, Shape& shape);
+  static Status readShape(const plist::Dictionary& description, Shape& shape);
+  static Status readKeys(const plist::Dictionary& description, Shape& shape);
 
   std::vector<std::unique_ptr<Shape>> shapes_;  // by number
   plist::PackedBuilder builder_;

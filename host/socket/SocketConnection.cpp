@@ -9,8 +9,6 @@
 #include "host/log/LogFloodGuard.h"
 #include "host/log/PrefixedLog.h"
 #include "host/ring/ReceivedDescriptors.h"
-#include "host/socket/Quotas.h"
-#include "wire/Encoder.h"
 
 namespace tarn::linux_host {
 
@@ -19,8 +17,6 @@ namespace {
 constexpr std::string_view kModule = "SocketConnection";
 // Replies that are sent before the turn's end, so that a gulp of small requests doesn't pile up large replies.
 constexpr std::size_t kEarlyFlushBytes = 262144;
-// Room for replies that a connection keeps while it is quiet.
-constexpr std::size_t kKeptOutputBytes = 65536;
 // While a client has more requests to be served, its replies are gathered up to so many bytes and for so many turns.
 constexpr std::size_t kGatheredReplyBytes = 4096;
 constexpr int kMostFlushesPutOff = 8;
@@ -44,7 +40,9 @@ SocketConnection::SocketConnection(ConnectionHost& host, UniqueDescriptor socket
       socket_(std::move(socket)),
       client_{.connection = number},
       frames_(host.limits.maxFrameBytes),
-      lane_(host.loop.queue().get()) {
+      lane_(host.loop.queue().get()),
+      use_(party(), host.limits.quotas),
+      output_(host.ledger) {
   const ucred peer = peerOf(socket_);
   client_.process = peer.pid;
   client_.user = peer.uid;
@@ -112,8 +110,7 @@ void SocketConnection::stopAtHead(std::uint32_t events) {
   }
   if ((events & (EPOLLHUP | EPOLLERR)) != 0) {
     // The peer is gone. That keeps until the request that it left could be served.
-    dropOutput();
-    outputBroken_ = true;
+    output_.breakOff();
     watch(0);
   } else {
     watch(watchedEvents_ & ~std::uint32_t{EPOLLIN});
@@ -132,7 +129,7 @@ bool SocketConnection::receive() {
   }
   inputWaits_ = false;
   if (bytes == 0) {
-    peerEnded(resetSeen_);
+    peerEnded(output_.resetSeen());
   } else if (errno != EAGAIN && errno != EINTR) {
     peerEnded(true);
   }
@@ -158,8 +155,7 @@ ShareHolder::Turn SocketConnection::takeTurn(std::int64_t credit) {
 }
 
 void SocketConnection::countSessions() {
-  const std::size_t sessions = object_ != nullptr ? object_->sessionCount() : 0;
-  party().sessions += sessions - std::exchange(countedSessions_, sessions);
+  use_.noteSessions(object_ != nullptr ? object_->sessionCount() : 0);
 }
 
 // The request that is held, and input that waits for the rest of its frame: so much of it.
@@ -168,10 +164,7 @@ void SocketConnection::countWaitingBytes(std::size_t half) {
     host_.halfFrames.note(halfFrame_, weak_from_this(), half, std::exchange(framesTaken_, false),
                           host_.loop.clock().monotonic());
   }
-  const std::size_t bytes = half + (heldRequest_ ? heldBytes_ : 0);
-  if (bytes != countedBytes_) {
-    party().waitingBytes += bytes - std::exchange(countedBytes_, bytes);
-  }
+  use_.noteWaitingBytes(half + (heldRequest_ ? heldBytes_ : 0));
   if (half != 0) {
     host_.watchHalfFrames();
   }
@@ -286,9 +279,8 @@ void SocketConnection::serveRequest(wire::DecodedRequest& request, std::size_t f
 
 // The request stays here until it can be served. Only one of a connection does, but there may be many connections.
 void SocketConnection::hold(wire::DecodedRequest& request, std::size_t frameBytes) {
-  const std::size_t limit = host_.limits.quotas.waitingBytesPerUser;
-  if (const std::size_t use = party().waitingBytes; use + frameBytes > limit) {
-    refuseRequest(request.id, overQuota("waiting_bytes", use, limit));
+  if (const std::string why = use_.refusalOfWaitingBytes(frameBytes); !why.empty()) {
+    refuseRequest(request.id, why);
     return;
   }
   heldRequest_ = std::move(request);
@@ -308,24 +300,14 @@ void SocketConnection::settle(std::uint64_t id) {
 }
 
 std::string SocketConnection::quotaRefusal(const wire::Request& request) {
-  const HostLimits::Quotas& quotas = host_.limits.quotas;
   if (request.operation == wire::Operation::SendMessage) {
-    if (quotas.messagesPerSecondPerConnection == 0 && quotas.messagesPerSecondPerUser == 0) return {};
-    const auto second = std::chrono::duration_cast<std::chrono::seconds>(host_.loop.clock().monotonic()).count();
-    if (beyondRate(rate_, quotas.messagesPerSecondPerConnection, second)) {
-      return overQuota("messages_per_second", rate_.messages, quotas.messagesPerSecondPerConnection);
-    }
-    if (beyondRate(party().rate, quotas.messagesPerSecondPerUser, second)) {
-      return overQuota("messages_per_second", party().rate.messages, quotas.messagesPerSecondPerUser);
-    }
-  } else if (request.operation == wire::Operation::CreateReportingSession && !object_->hasSession(request.reporterID)) {
+    if (!use_.limitsMessages()) return {};
+    const auto now = host_.loop.clock().monotonic();
+    return use_.refusalOfMessage(std::chrono::duration_cast<std::chrono::seconds>(now).count());
+  }
+  if (request.operation == wire::Operation::CreateReportingSession && !object_->hasSession(request.reporterID)) {
     countSessions();
-    if (countedSessions_ >= quotas.sessionsPerConnection) {
-      return overQuota("sessions", countedSessions_, quotas.sessionsPerConnection);
-    }
-    if (party().sessions >= quotas.sessionsPerUser) {
-      return overQuota("sessions", party().sessions, quotas.sessionsPerUser);
-    }
+    return use_.refusalOfSession();
   }
   return {};
 }
@@ -340,30 +322,24 @@ void SocketConnection::serveRingOperation(const wire::DecodedRequest& request) {
   if (rings_ == nullptr) {
     rings_ = host_.rings.connect(weak_from_this());
   }
-  wire::ErrorCode code = wire::ErrorCode::BadArguments;
-  std::string wrong;
   if (request.operation == wire::Operation::OpenRing) {
-    const ConnectionRings::Opened opened = rings_->open(std::exchange(descriptors_, {}));
-    wrong = opened.error;
-    if (wrong.empty()) {
-      sendReply(request.id, {opened.number});
-    }
-  } else if (request.operation == wire::Operation::DeclareShape) {
-    wrong = rings_->declareShape(request.dictionary);
-    if (wrong.empty()) {
-      sendReply(request.id, {true});
-    }
+    const Result<std::uint64_t> opened = rings_->open(std::exchange(descriptors_, {}));
+    answerRingOperation(request.id, opened.value, opened.error);
   } else {
-    code = wire::ErrorCode::UnknownOperation;
-    wrong = "unknown operation";
-  }
-  if (!wrong.empty()) {
-    host_.ledger.countRefusal(code);
-    sendError(request.id, {wire::kErrorDomain, static_cast<std::int64_t>(code), wrong});
+    answerRingOperation(request.id, true, rings_->declareShape(request.dictionary));
   }
 }
 
-// In the connection's own line, behind what it sent over the socket before.
+void SocketConnection::answerRingOperation(std::uint64_t id, plist::ValueView result, const Status& done) {
+  if (done.ok()) {
+    sendReply(id, {result});
+    return;
+  }
+  host_.ledger.countRefusal(wire::ErrorCode::BadArguments);
+  sendError(id, {wire::kErrorDomain, static_cast<std::int64_t>(wire::ErrorCode::BadArguments), done->text});
+}
+
+// In the connection's own line, after what it sent over the socket before.
 void SocketConnection::serveRingRequest(wire::DecodedRequest& request) {
   if (request.operation == wire::Operation::SendMessage) {
     ++host_.ledger.messagesReceived;
@@ -385,37 +361,15 @@ void SocketConnection::endInput() {
   }
 }
 
-bool SocketConnection::takesReplies() noexcept {
-  if ((state_ == State::Open || state_ == State::Ending) && !outputBroken_) return true;
-  ++host_.ledger.repliesDropped;
-  return false;
-}
-
-void SocketConnection::sendReply(std::uint64_t id, std::initializer_list<plist::ValueView> results) {
-  if (takesReplies()) {
-    wire::Encoder(output_).reply(id, results);
-    replyAppended();
+template <class Content>
+void SocketConnection::reply(std::uint64_t id, const Content& content) {
+  if ((state_ != State::Open && state_ != State::Ending) || output_.broken()) {
+    output_.countDropped();
+    return;
   }
-}
-
-void SocketConnection::sendNumbers(std::uint64_t id, std::span<const std::int64_t> numbers) {
-  if (takesReplies()) {
-    wire::Encoder(output_).replyWithNumbers(id, numbers);
-    replyAppended();
-  }
-}
-
-void SocketConnection::sendError(std::uint64_t id, const platform::RemoteError& error) {
-  if (takesReplies()) {
-    wire::Encoder(output_).errorReply(id, error.domain, error.code, error.text);
-    replyAppended();
-  }
-}
-
-void SocketConnection::replyAppended() {
-  ++unsentReplies_;
+  output_.append(id, content);
   const bool waitsForRoom = (watchedEvents_ & EPOLLOUT) != 0;
-  if (unsentBytes() > (waitsForRoom ? host_.limits.maxUnreadReplyBytes : kEarlyFlushBytes)) {
+  if (output_.unsentBytes() > (waitsForRoom ? host_.limits.maxUnreadReplyBytes : kEarlyFlushBytes)) {
     flush();
   } else if (!waitsForRoom && !flushAsked_) {
     flushAsked_ = true;
@@ -423,67 +377,47 @@ void SocketConnection::replyAppended() {
   }
 }
 
-void SocketConnection::flush() {
-  const LogClientScope scope(client_);
-  flushAsked_ = false;
-  if (queued() && host_.gathersReplies && host_.gate.open() && unsentBytes() < kGatheredReplyBytes &&
+void SocketConnection::sendReply(std::uint64_t id, std::initializer_list<plist::ValueView> results) {
+  reply(id, results);
+}
+
+void SocketConnection::sendNumbers(std::uint64_t id, std::span<const std::int64_t> numbers) {
+  reply(id, numbers);
+}
+
+void SocketConnection::sendError(std::uint64_t id, const platform::RemoteError& error) {
+  reply(id, error);
+}
+
+bool SocketConnection::gathersReplies() {
+  if (queued() && host_.gathersReplies && host_.gate.open() && output_.unsentBytes() < kGatheredReplyBytes &&
       flushesPutOff_ < kMostFlushesPutOff) {
     ++flushesPutOff_;
-    flushAsked_ = true;
+    return true;
+  }
+  flushesPutOff_ = 0;
+  return false;
+}
+
+void SocketConnection::flush() {
+  const LogClientScope scope(client_);
+  flushAsked_ = gathersReplies();
+  if (flushAsked_) {
     host_.loop.flushLater(shared_from_this());
     return;
   }
-  flushesPutOff_ = 0;
-  if (!socket_ || !sendSome()) return;
-  if (unsentBytes() == 0) {
-    host_.ledger.repliesSent += std::exchange(unsentReplies_, 0);
-    dropOutput();
-  } else if (sentBytes_ > output_.size() / 2) {
-    output_.erase(0, std::exchange(sentBytes_, 0));
-  }
+  if (!socket_ || !output_.sendSome(socket_.get())) return;
+  const std::size_t unsent = output_.unsentBytes();
   if (state_ != State::Open) {
-    if (unsentBytes() > host_.limits.maxUnreadReplyBytes) {
-      outputBroken_ = true;
-      dropOutput();
+    if (unsent > host_.limits.maxUnreadReplyBytes) {
+      output_.breakOff();
     }
-    return;
-  }
-  if (unsentBytes() > host_.limits.maxUnreadReplyBytes) {
-    cut(CutReason::UnreadReplies, std::to_string(unsentBytes()) + " bytes of replies left unread");
-  } else if (unsentBytes() != 0) {
+  } else if (unsent > host_.limits.maxUnreadReplyBytes) {
+    cut(CutReason::UnreadReplies, std::to_string(unsent) + " bytes of replies left unread");
+  } else if (unsent != 0) {
     watch(watchedEvents_ | EPOLLOUT);
   } else {
     watch(watchedEvents_ & ~std::uint32_t{EPOLLOUT});
-  }
-}
-
-// Sends what the system takes now. False when the peer will never take any more.
-bool SocketConnection::sendSome() {
-  while (unsentBytes() != 0) {
-    const ssize_t bytes =
-        ::send(socket_.get(), output_.data() + sentBytes_, unsentBytes(), MSG_NOSIGNAL | MSG_DONTWAIT);
-    if (bytes >= 0) {
-      sentBytes_ += static_cast<std::size_t>(bytes);
-    } else if (errno == EAGAIN) {
-      return true;
-    } else if (errno != EINTR) {
-      // What the peer sent before is still there to be read, and its end behind that.
-      resetSeen_ = errno == ECONNRESET;
-      outputBroken_ = true;
-      dropOutput();
-      return false;
-    }
-  }
-  return true;
-}
-
-void SocketConnection::dropOutput() noexcept {
-  host_.ledger.repliesDropped += std::exchange(unsentReplies_, 0);
-  sentBytes_ = 0;
-  if (output_.capacity() > kKeptOutputBytes) {
-    output_ = std::string();
-  } else {
-    output_.clear();
   }
 }
 
@@ -515,7 +449,7 @@ void SocketConnection::beginEnd(bool interrupted) {
   countWaitingBytes(0);
   watch(0);
   if (interrupted) {
-    dropOutput();
+    output_.drop();
     socket_.reset();
   }
   const auto ended = [connection = shared_from_this(), interrupted] {
@@ -533,7 +467,7 @@ void SocketConnection::beginEnd(bool interrupted) {
 
 void SocketConnection::finish(bool interrupted) {
   flush();
-  dropOutput();
+  output_.drop();
   state_ = State::Ended;
   socket_.reset();
   --host_.ledger.connectionsOpen;

@@ -20,6 +20,8 @@
 #include "host/log/LogClient.h"
 #include "host/ring/ConnectionRings.h"
 #include "host/socket/ConnectionHost.h"
+#include "host/socket/QuotaUse.h"
+#include "host/socket/ReplyOutput.h"
 #include "host/socket/RequestDispatcher.h"
 #include "host/system/UniqueDescriptor.h"
 #include "platform/Listener.h"
@@ -66,7 +68,7 @@ class SocketConnection final : public platform::Connection,
   void sendReply(std::uint64_t id, std::initializer_list<plist::ValueView> results) override;
   void sendNumbers(std::uint64_t id, std::span<const std::int64_t> numbers) override;
   void sendError(std::uint64_t id, const platform::RemoteError& error) override;
-  void dropReply() override { ++host_.ledger.repliesDropped; }
+  void dropReply() override { output_.countDropped(); }
 
   bool takesRingRequests() override { return object_ != nullptr && host_.gate.open(); }
   void serveRingRequest(wire::DecodedRequest& request) override;
@@ -94,20 +96,19 @@ class SocketConnection final : public platform::Connection,
   // Why the request is beyond a quota; empty when it is not.
   std::string quotaRefusal(const wire::Request& request);
   void refuseRequest(std::uint64_t id, const std::string& why);
-  // Keeps what is known of the user's use in step.
+  // Keeps what is known of the use of quotas in step.
   void countSessions();
   void countWaitingBytes(std::size_t half);
   // While the gate is shut: answers `status` and stops at the first other request.
   void stopAtHead(std::uint32_t events);
   void serveRingOperation(const wire::DecodedRequest& request);
+  void answerRingOperation(std::uint64_t id, plist::ValueView result, const Status& done);
 
-  // Whether a reply can still be sent; counts it as dropped when not.
-  bool takesReplies() noexcept;
-  // Behind every frame that was appended to output_.
-  void replyAppended();
-  std::size_t unsentBytes() const noexcept { return output_.size() - sentBytes_; }
-  bool sendSome();
-  void dropOutput() noexcept;
+  // Sends the reply, or counts it as dropped when nobody can get it any more.
+  template <class Content>
+  void reply(std::uint64_t id, const Content& content);
+  // Whether the replies had better go out with those of the next turns.
+  bool gathersReplies();
 
   void peerEnded(bool reset);
   void cut(CutReason reason, const std::string& why);
@@ -133,20 +134,14 @@ class SocketConnection final : public platform::Connection,
   std::optional<wire::DecodedRequest> heldRequest_;  // the head request while the gate is shut
   std::size_t heldBytes_ = 0;                        // of its frame
   std::string refusal_;                              // the answer to every request; empty: they are served
-  std::size_t countedSessions_ = 0;                  // by the user's party
-  std::size_t countedBytes_ = 0;
-  MessageRate rate_;
+  QuotaUse use_;
   HalfFrames::Place halfFrame_;
   bool framesTaken_ = false;         // since the half frame was noted
   std::uint32_t watchedEvents_ = 0;  // 0: not watched at all
 
-  std::string output_;
-  std::size_t sentBytes_ = 0;        // of output_
-  std::uint64_t unsentReplies_ = 0;  // in output_
+  ReplyOutput output_;
   bool flushAsked_ = false;
   int flushesPutOff_ = 0;
-  bool outputBroken_ = false;  // the peer takes nothing more
-  bool resetSeen_ = false;
 };
 
 }  // namespace tarn::linux_host

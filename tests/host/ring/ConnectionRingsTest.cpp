@@ -26,7 +26,7 @@ std::string frameOf(const wire::Request& request) {
 TEST_F(ConnectionRingsTest, MessagesAreServedInTheirOrder) {
   start();
   ClientRing ring;
-  EXPECT_EQ(open(ring).number, 1U);
+  EXPECT_EQ(open(ring).value, 1U);
   EXPECT_EQ(declare(5), "");
   for (std::uint64_t number = 0; number < 500; ++number) {
     while (!ring.message(5, {number})) {
@@ -43,7 +43,7 @@ TEST_F(ConnectionRingsTest, MessagesAreServedInTheirOrder) {
 TEST_F(ConnectionRingsTest, FramesOfTheWireAreServedToo) {
   start();
   ClientRing ring;
-  ASSERT_EQ(open(ring).error, "");
+  ASSERT_EQ(open(ring).error.text(), "");
   wire::Request create;
   create.operation = wire::Operation::CreateReportingSession;
   create.reporterID = 77;
@@ -58,7 +58,7 @@ TEST_F(ConnectionRingsTest, FramesOfTheWireAreServedToo) {
 TEST_F(ConnectionRingsTest, AShapeMayBeDeclaredInTheRing) {
   start();
   ClientRing ring;
-  ASSERT_EQ(open(ring).error, "");
+  ASSERT_EQ(open(ring).error.text(), "");
   wire::Request shape;
   shape.operation = wire::Operation::DeclareShape;
   shape.dictionary = {
@@ -72,7 +72,7 @@ TEST_F(ConnectionRingsTest, AShapeMayBeDeclaredInTheRing) {
 TEST_F(ConnectionRingsTest, RecordsThatCannotBeServedAreCountedByReasonAndGoneOnWith) {
   start();
   ClientRing ring;
-  ASSERT_EQ(open(ring).error, "");
+  ASSERT_EQ(open(ring).error.text(), "");
   ASSERT_EQ(declare(5), "");
   ring.post(TARNRING_FRAME, "\x82\x01\x18\x63");                       // operation 99
   ring.post(TARNRING_FRAME, std::string_view("\x82\x01\x18\x64", 4));  // status, the host's own
@@ -101,7 +101,7 @@ TEST_F(ConnectionRingsTest, RecordsThatCannotBeServedAreCountedByReasonAndGoneOn
 TEST_F(ConnectionRingsTest, AMessageWaitsForItsShape) {
   start();
   ClientRing ring;
-  ASSERT_EQ(open(ring).error, "");
+  ASSERT_EQ(open(ring).error.text(), "");
   ring.message(5, {1});
   EXPECT_FALSE(eventually([&] { return owner_->count != 0; }, std::chrono::seconds(0)));
   EXPECT_EQ(seen(ring.header()->taken), 0U);
@@ -112,7 +112,7 @@ TEST_F(ConnectionRingsTest, AMessageWaitsForItsShape) {
 TEST_F(ConnectionRingsTest, NothingIsServedWhileItsOwnerTakesNothing) {
   start();
   ClientRing ring;
-  ASSERT_EQ(open(ring).error, "");
+  ASSERT_EQ(open(ring).error.text(), "");
   ASSERT_EQ(declare(5), "");
   owner_->takes = false;
   ring.message(5, {1});
@@ -131,7 +131,7 @@ TEST_F(ConnectionRingsTest, DroppedMessagesReachTheLedger) {
   ring.message(5, {1});
   const std::uint64_t posted = seen(ring.header()->posted);
   ring.header()->dropped -= 2;  // what was dropped before it was opened isn't this connection's
-  ASSERT_EQ(open(ring).error, "");
+  ASSERT_EQ(open(ring).error.text(), "");
   ring.header()->dropped += 2;
   EXPECT_TRUE(eventuallyServed(posted));
   EXPECT_TRUE(eventually([&] { return counts().droppedByClients == 2; }));
@@ -143,7 +143,7 @@ TEST_F(ConnectionRingsTest, DroppedMessagesReachTheLedger) {
 TEST_F(ConnectionRingsTest, CommittedFollowsTheRecorder) {
   start();
   ClientRing ring;
-  ASSERT_EQ(open(ring).error, "");
+  ASSERT_EQ(open(ring).error.text(), "");
   ASSERT_EQ(declare(5), "");
   handedOver = 10;
   committed = 4;
@@ -162,7 +162,7 @@ TEST_F(ConnectionRingsTest, CommittedFollowsTheRecorder) {
 TEST_F(ConnectionRingsTest, NothingCountsAsHandedOverWhileWorkersHaveWork) {
   start();
   ClientRing ring;
-  ASSERT_EQ(open(ring).error, "");
+  ASSERT_EQ(open(ring).error.text(), "");
   ASSERT_EQ(declare(5), "");
   settled = false;
   ring.message(5, {1});
@@ -177,7 +177,7 @@ TEST_F(ConnectionRingsTest, AQuietRingSleepsAndIsWoken) {
   limits.awakeFor = std::chrono::milliseconds(10);
   start();
   ClientRing ring;
-  ASSERT_EQ(open(ring).error, "");
+  ASSERT_EQ(open(ring).error.text(), "");
   ASSERT_EQ(declare(5), "");
   for (std::size_t round = 1; round <= 3; ++round) {
     ASSERT_TRUE(eventually([&] { return seen(ring.header()->asleep) != 0; }));
@@ -192,7 +192,7 @@ TEST_F(ConnectionRingsTest, TheEndOfAConnectionServesWhatWasPosted) {
   limits.turnBytes = 64;
   start();
   ClientRing ring;
-  ASSERT_EQ(open(ring).error, "");
+  ASSERT_EQ(open(ring).error.text(), "");
   ASSERT_EQ(declare(5), "");
   owner_->takes = false;
   for (std::uint64_t number = 0; number < 100; ++number) {
@@ -212,7 +212,7 @@ TEST_F(ConnectionRingsTest, TheEndOfAConnectionServesWhatWasPosted) {
 TEST_F(ConnectionRingsTest, AClientThatPostsForEverDoesNotKeepItsConnectionFromEnding) {
   start();
   ClientRing ring;
-  ASSERT_EQ(open(ring).error, "");
+  ASSERT_EQ(open(ring).error.text(), "");
   ASSERT_EQ(declare(5), "");
   std::atomic<bool> over{false};
   std::thread poster([&] {
@@ -228,7 +228,7 @@ TEST_F(ConnectionRingsTest, AClientThatPostsForEverDoesNotKeepItsConnectionFromE
 TEST_F(ConnectionRingsTest, ARingThatItsClientEndedIsClosedOnceItIsRead) {
   start();
   ClientRing ring;
-  ASSERT_EQ(open(ring).error, "");
+  ASSERT_EQ(open(ring).error.text(), "");
   ASSERT_EQ(declare(5), "");
   ring.message(5, {1});
   ring::SharedWords::storeRelease(&ring.header()->ended, 1);
@@ -241,15 +241,15 @@ TEST_F(ConnectionRingsTest, ARingThatItsClientEndedIsClosedOnceItIsRead) {
 TEST_F(ConnectionRingsTest, ARingIsReadOnByTheNextConnectionAndByOneAtATime) {
   start();
   ClientRing ring;
-  ASSERT_EQ(open(ring).error, "");
+  ASSERT_EQ(open(ring).error.text(), "");
   ASSERT_EQ(declare(5), "");
   ring.message(5, {0});
   ASSERT_TRUE(eventuallyServed(1));
-  EXPECT_EQ(open(ring).error, "openRing: the ring is open already");
+  EXPECT_EQ(open(ring).error.text(), "openRing: the ring is open already");
   ASSERT_TRUE(end());
   ring.message(5, {1});
   rings_ = running_.onQueue([&] { return board_->connect(owner_); });
-  ASSERT_EQ(open(ring).error, "");
+  ASSERT_EQ(open(ring).error.text(), "");
   ASSERT_EQ(declare(5), "");
   EXPECT_TRUE(eventuallyServed(2));
   EXPECT_EQ(numbers(), upTo(2));
@@ -259,9 +259,9 @@ TEST_F(ConnectionRingsTest, ThereIsABoundToTheRingsOfAConnection) {
   limits.maxRingsAConnection = 2;
   start();
   const ClientRing rings[3];
-  EXPECT_EQ(open(rings[0]).error, "");
-  EXPECT_EQ(open(rings[1]).error, "");
-  EXPECT_EQ(open(rings[2]).error, "openRing: too many rings");
+  EXPECT_EQ(open(rings[0]).error.text(), "");
+  EXPECT_EQ(open(rings[1]).error.text(), "");
+  EXPECT_EQ(open(rings[2]).error.text(), "openRing: too many rings");
   EXPECT_EQ(faults(RingFault::TooMany), 1U);
   EXPECT_EQ(counts().open, 2U);
 }
@@ -269,14 +269,15 @@ TEST_F(ConnectionRingsTest, ThereIsABoundToTheRingsOfAConnection) {
 TEST_F(ConnectionRingsTest, OtherDescriptorsAreRefusedWithOneLine) {
   start();
   const ClientRing ring;
-  EXPECT_EQ(openWith({}).error, "openRing: a memory file and an eventfd expected");
+  EXPECT_EQ(openWith({}).error.text(), "openRing: a memory file and an eventfd expected");
   auto swapped = ring.descriptors();
   std::swap(swapped[0], swapped[1]);
-  EXPECT_NE(openWith(std::move(swapped)).error, "");
+  EXPECT_NE(openWith(std::move(swapped)).error.text(), "");
   auto one = ring.descriptors();
   one.pop_back();
-  EXPECT_NE(openWith(std::move(one)).error, "");
-  EXPECT_EQ(open(ClientRing(4096, 0)).error, "openRing: a memory file sealed against shrinking and growing expected");
+  EXPECT_NE(openWith(std::move(one)).error.text(), "");
+  EXPECT_EQ(open(ClientRing(4096, 0)).error.text(),
+            "openRing: a memory file sealed against shrinking and growing expected");
   EXPECT_EQ(faults(RingFault::Descriptors), 3U);
   EXPECT_EQ(log_.entries(platform::LogLevel::Error).size(), 1U);
   EXPECT_EQ(counts().open, 0U);

@@ -28,7 +28,7 @@ TEST_F(HostileWriter, AHeadThatMakesNoSenseClosesTheRing) {
   for (const std::uint64_t head :
        {~std::uint64_t{0}, ~std::uint64_t{7}, std::uint64_t{4}, std::uint64_t{4104}, std::uint64_t{1} << 63}) {
     const ClientRing ring;
-    ASSERT_EQ(open(ring).error, "");
+    ASSERT_EQ(open(ring).error.text(), "");
     ring::SharedWords::storeRelease(&ring.header()->head, head);
     EXPECT_TRUE(eventually([&] { return faults(RingFault::Broken) == closed + 1; })) << head;
     ++closed;
@@ -42,7 +42,7 @@ TEST_F(HostileWriter, ATakenThatMakesNoSenseClosesTheRing) {
   const ClientRing ring;
   ring.header()->taken = 3;
   ring.header()->head = 3;
-  ASSERT_EQ(open(ring).error, "");
+  ASSERT_EQ(open(ring).error.text(), "");
   EXPECT_TRUE(eventuallyClosed());
 }
 
@@ -63,7 +63,7 @@ TEST_F(HostileWriter, LengthsThatLieCloseTheRing) {
   ) {
     const ClientRing ring;
     writeHead(ring, row.kind, row.length);
-    ASSERT_EQ(open(ring).error, "");
+    ASSERT_EQ(open(ring).error.text(), "");
     ring::SharedWords::storeRelease(&ring.header()->head, row.head);
     EXPECT_TRUE(eventually([&] { return faults(RingFault::Broken) == closed + 1; })) << row.kind << ' ' << row.length;
     ++closed;
@@ -76,7 +76,7 @@ TEST_F(HostileWriter, ARecordMayNotReachOverTheEndOfTheArea) {
   ring.header()->taken = ring.header()->head = 4096 - 16;
   const std::uint64_t word = std::uint64_t{TARNRING_FRAME} << 32U | 16;
   std::memcpy(ring.data() + 4096 - 16, &word, sizeof word);
-  ASSERT_EQ(open(ring).error, "");
+  ASSERT_EQ(open(ring).error.text(), "");
   ring::SharedWords::storeRelease(&ring.header()->head, 4096 + 64);
   EXPECT_TRUE(eventuallyClosed());
 }
@@ -85,9 +85,9 @@ TEST_F(HostileWriter, OthersDoNotNotice) {
   start();
   ClientRing good;
   ClientRing bad;
-  ASSERT_EQ(open(good).error, "");
+  ASSERT_EQ(open(good).error.text(), "");
   ASSERT_EQ(declare(5), "");
-  ASSERT_EQ(open(bad).error, "");
+  ASSERT_EQ(open(bad).error.text(), "");
   ring::SharedWords::storeRelease(&bad.header()->head, 12345);
   ASSERT_TRUE(eventually([&] { return faults(RingFault::Broken) == 1; }));
   good.message(5, {1});
@@ -97,7 +97,7 @@ TEST_F(HostileWriter, OthersDoNotNotice) {
 TEST_F(HostileWriter, AClientThatFillsItsRingForEverLeavesOthersTheirTurn) {
   start();
   ClientRing greedy;
-  ASSERT_EQ(open(greedy).error, "");
+  ASSERT_EQ(open(greedy).error.text(), "");
   ASSERT_EQ(declare(5), "");
   std::atomic<bool> over{false};
   std::thread poster([&] {
@@ -108,7 +108,7 @@ TEST_F(HostileWriter, AClientThatFillsItsRingForEverLeavesOthersTheirTurn) {
   const auto other = std::make_shared<testing::NotingOwner>(running_.loop);
   const auto rings = running_.onQueue([&] { return board_->connect(other); });
   ClientRing modest;
-  ASSERT_EQ(running_.onQueue([&] { return rings->open(modest.descriptors()).error; }), "");
+  ASSERT_EQ(running_.onQueue([&] { return rings->open(modest.descriptors()).error.text(); }), "");
   modest.post(TARNRING_FRAME, "\x83\x01\x01\x05");
   EXPECT_TRUE(eventually([&] { return other->count == 1; }));
   over = true;
@@ -144,7 +144,7 @@ TEST_F(HostileWriter, ScribblingOverHeaderAndDataHarmsNobodyElse) {
     std::mt19937_64 random(seed);
     for (int round = 0; round < 40; ++round) {
       ClientRing ring;
-      ASSERT_EQ(open(ring).error, "");
+      ASSERT_EQ(open(ring).error.text(), "");
       for (int shape = 0; shape < 4; ++shape) {
         ASSERT_EQ(declare(shape), "");
       }
@@ -159,7 +159,7 @@ TEST_F(HostileWriter, ScribblingOverHeaderAndDataHarmsNobodyElse) {
     }
   }
   ClientRing ring;
-  ASSERT_EQ(open(ring).error, "");
+  ASSERT_EQ(open(ring).error.text(), "");
   ASSERT_EQ(declare(5), "");
   const std::size_t before = owner_->count;
   ring.message(5, {1});

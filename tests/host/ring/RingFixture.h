@@ -38,7 +38,7 @@ class NotingOwner : public linux_host::RingOwner {
 
 class RingFixture : public ::testing::Test {
  protected:
-  using Opened = linux_host::ConnectionRings::Opened;
+  using Opened = Result<std::uint64_t>;
 
   // `limits` and the recorder are set before.
   void start() {
@@ -61,11 +61,13 @@ class RingFixture : public ::testing::Test {
   }
   std::string declare(std::int64_t shape) {
     return running_.onQueue([&] {
-      return rings_->declareShape({{"shape", shape},
-                                   {"category", 4},
-                                   {"type", 1},
-                                   {"keys", plist::Array{"number"}},
-                                   {"kinds", plist::Array{"integer"}}});
+      return rings_
+          ->declareShape({{"shape", shape},
+                          {"category", 4},
+                          {"type", 1},
+                          {"keys", plist::Array{"number"}},
+                          {"kinds", plist::Array{"integer"}}})
+          .text();
     });
   }
   bool eventuallyServed(std::size_t count) {

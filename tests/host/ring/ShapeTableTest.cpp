@@ -19,6 +19,11 @@ Dictionary shapeOf(const Array& keys, const Array& kinds, std::int64_t number = 
           {"keys", keys},    {"kinds", kinds}};
 }
 
+// What is wrong with it; empty: nothing.
+std::string declared(ShapeTable& table, const Dictionary& description) {
+  return table.declare(description).text();
+}
+
 ShapeTable::Decoded decode(ShapeTable& table, const std::string& content, wire::DecodedRequest& request) {
   return table.decode(std::as_bytes(std::span(content)), request);
 }
@@ -33,7 +38,7 @@ void appendText(std::string& content, std::string_view text) {
 
 TEST(ShapeTable, AMessageBecomesARequestWithItsStamp) {
   ShapeTable table;
-  ASSERT_EQ(table.declare(shapeOf({"i", "u", "d", "t", "b"}, {"integer", "unsigned", "double", "date", "boolean"})),
+  ASSERT_EQ(declared(table, shapeOf({"i", "u", "d", "t", "b"}, {"integer", "unsigned", "double", "date", "boolean"})),
             "");
   wire::DecodedRequest request;
   const std::string content =
@@ -56,7 +61,7 @@ TEST(ShapeTable, AMessageBecomesARequestWithItsStamp) {
 
 TEST(ShapeTable, TextsAndDataMayHaveAnyLength) {
   ShapeTable table;
-  ASSERT_EQ(table.declare(shapeOf({"a", "b", "c"}, {"text", "data", "text"})), "");
+  ASSERT_EQ(declared(table, shapeOf({"a", "b", "c"}, {"text", "data", "text"})), "");
   std::string content = ClientRing::contentOf(3, {}, 1000000000);
   content[12] = 3;  // values
   appendText(content, "");
@@ -71,7 +76,7 @@ TEST(ShapeTable, TextsAndDataMayHaveAnyLength) {
 
 TEST(ShapeTable, AShapeWithTheStampsKeyKeepsItsOwn) {
   ShapeTable table;
-  ASSERT_EQ(table.declare(shapeOf({"tarnreporting_timestamp"}, {"integer"})), "");
+  ASSERT_EQ(declared(table, shapeOf({"tarnreporting_timestamp"}, {"integer"})), "");
   wire::DecodedRequest request;
   ASSERT_EQ(decode(table, ClientRing::contentOf(3, {99}), request), ShapeTable::Decoded::Ok);
   EXPECT_EQ(request.dictionary, (Dictionary{{"tarnreporting_timestamp", 99}}));
@@ -79,7 +84,7 @@ TEST(ShapeTable, AShapeWithTheStampsKeyKeepsItsOwn) {
 
 TEST(ShapeTable, ValuesThatDoNotFitAreRefused) {
   ShapeTable table;
-  ASSERT_EQ(table.declare(shapeOf({"a", "b"}, {"boolean", "text"})), "");
+  ASSERT_EQ(declared(table, shapeOf({"a", "b"}, {"boolean", "text"})), "");
   wire::DecodedRequest request;
   std::string good = ClientRing::contentOf(3, {1});
   good[12] = 2;
@@ -112,18 +117,18 @@ TEST(ShapeTable, AShapeIsReplacedAndForgotten) {
   wire::DecodedRequest request;
   const std::string content = ClientRing::contentOf(3, {1});
   EXPECT_EQ(decode(table, content, request), ShapeTable::Decoded::UnknownShape);
-  ASSERT_EQ(table.declare(shapeOf({"a"}, {"integer"})), "");
-  ASSERT_EQ(table.declare(shapeOf({"b"}, {"integer"})), "");
+  ASSERT_EQ(declared(table, shapeOf({"a"}, {"integer"})), "");
+  ASSERT_EQ(declared(table, shapeOf({"b"}, {"integer"})), "");
   ASSERT_EQ(decode(table, content, request), ShapeTable::Decoded::Ok);
   EXPECT_EQ(request.dictionary["b"].asInt64(), 1);
-  ASSERT_EQ(table.declare({{"shape", 3}}), "");
+  ASSERT_EQ(declared(table, {{"shape", 3}}), "");
   EXPECT_EQ(decode(table, content, request), ShapeTable::Decoded::UnknownShape);
   EXPECT_EQ(decode(table, ClientRing::contentOf(1024, {1}), request), ShapeTable::Decoded::BadValues);
 }
 
 TEST(ShapeTable, WhatIsNoShapeIsRefusedAndTheOldOneStays) {
   ShapeTable table;
-  ASSERT_EQ(table.declare(shapeOf({"a"}, {"integer"})), "");
+  ASSERT_EQ(declared(table, shapeOf({"a"}, {"integer"})), "");
   Dictionary many = shapeOf({"a"}, {"integer"});
   many.set("other", 1);
   const auto with = [](const char* key, const plist::ValueView& value) {
@@ -148,7 +153,7 @@ TEST(ShapeTable, WhatIsNoShapeIsRefusedAndTheOldOneStays) {
                               with("keys", "a"),
                               many};
   for (const Dictionary& shape : wrong) {
-    EXPECT_NE(table.declare(shape), "") << plist::description(shape);
+    EXPECT_NE(declared(table, shape), "") << plist::description(shape);
   }
   wire::DecodedRequest request;
   EXPECT_EQ(decode(table, ClientRing::contentOf(3, {1}), request), ShapeTable::Decoded::Ok);
@@ -162,10 +167,10 @@ TEST(ShapeTable, AShapeHasAtMost64Keys) {
     kinds.append("integer");
   }
   ShapeTable table;
-  EXPECT_EQ(table.declare(shapeOf(keys, kinds)), "");
+  EXPECT_EQ(declared(table, shapeOf(keys, kinds)), "");
   keys.append("one more");
   kinds.append("integer");
-  EXPECT_NE(table.declare(shapeOf(keys, kinds)), "");
+  EXPECT_NE(declared(table, shapeOf(keys, kinds)), "");
 }
 
 }  // namespace

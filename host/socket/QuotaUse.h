@@ -1,0 +1,43 @@
+// QuotaUse: what one connection takes of its own and its user's quotas.
+//
+// Threads: the main loop's.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <string>
+
+#include "host/socket/FairShares.h"
+#include "host/socket/HostLimits.h"
+
+namespace tarn::linux_host {
+
+class QuotaUse {
+ public:
+  // Both outlive it.
+  QuotaUse(ShareParty& party, const HostLimits::Quotas& quotas) noexcept : party_(party), quotas_(quotas) {}
+  QuotaUse(const QuotaUse&) = delete;
+  QuotaUse& operator=(const QuotaUse&) = delete;
+
+  // The connection has so many sessions, or waiting bytes, by now.
+  void noteSessions(std::size_t sessions) noexcept;
+  void noteWaitingBytes(std::size_t bytes) noexcept;
+
+  // Why one more is beyond a quota; empty when it is not.
+  std::string refusalOfSession() const;
+  std::string refusalOfWaitingBytes(std::size_t more) const;
+  // A message that isn't refused counts.
+  std::string refusalOfMessage(std::int64_t second);
+  bool limitsMessages() const noexcept {
+    return quotas_.messagesPerSecondPerConnection != 0 || quotas_.messagesPerSecondPerUser != 0;
+  }
+
+ private:
+  ShareParty& party_;
+  const HostLimits::Quotas& quotas_;
+  std::size_t sessions_ = 0;  // as the party counts them
+  std::size_t waitingBytes_ = 0;
+  MessageRate rate_;
+};
+
+}  // namespace tarn::linux_host
