@@ -174,7 +174,6 @@ void ClientConnection::readSome(bool mayWait) {
 void ClientConnection::takeFrames() {
   std::span<const std::byte> frame;
   wire::DecodedReply decoded;
-  std::string reason;
   while (connected()) {
     switch (frames_.next(frame)) {
       case wire::FrameBuffer::Next::Incomplete:
@@ -185,8 +184,8 @@ void ClientConnection::takeFrames() {
       case wire::FrameBuffer::Next::Frame:
         break;
     }
-    if (!decoder_.decode(frame, decoded, reason)) {
-      lose("an unreadable reply: " + reason);
+    if (const Status read = decoder_.decode(frame, decoded); read.failed()) {
+      lose("an unreadable reply: " + read->text);
       return;
     }
     takeReply(decoded);

@@ -14,6 +14,8 @@
 
 namespace {
 
+using tarn::Result;
+using tarn::recorder::EventPage;
 using tarn::recorder::EventQuery;
 using tarn::recorder::EventReader;
 
@@ -55,13 +57,15 @@ std::string contents(const std::filesystem::path& file) {
 }
 
 void checkRead(EventReader& reader, const EventQuery& query) {
-  const EventReader::Result result = reader.read(query);
-  if (result.status != EventReader::Status::Ok) {
-    check(!result.error.empty() && result.rows.empty() && !result.more);
+  const Result<EventPage> result = reader.read(query);
+  const EventPage& page = result.value;
+  if (result.failed() || page.missing) {
+    check((result.failed() != page.missing) && page.rows.empty() && !page.more);
+    check(result.ok() || !result.error->text.empty());
     return;
   }
-  check(result.error.empty() && result.rows.size() <= query.limit);
-  check(result.more == (result.rows.size() == query.limit));
+  check(page.rows.size() <= query.limit);
+  check(page.more == (page.rows.size() == query.limit));
 }
 
 }  // namespace

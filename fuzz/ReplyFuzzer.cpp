@@ -13,9 +13,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   const std::span<const std::byte> frame = std::as_bytes(std::span(data, size));
   wire::ReplyDecoder decoder;
   wire::DecodedReply reply;
-  std::string reason;
-  if (!decoder.decode(frame, reply, reason)) {
-    if (reason.empty()) {
+  if (const Status read = decoder.decode(frame, reply); read.failed()) {
+    if (read->text.empty()) {
       std::abort();
     }
     return 0;

@@ -108,14 +108,13 @@ bool ReplyPass::readContainer(const CborHead& head, plist::Value& value) {
 
 }  // namespace
 
-bool ReplyDecoder::decode(std::span<const std::byte> frame, DecodedReply& reply, std::string& reason) {
+Status ReplyDecoder::decode(std::span<const std::byte> frame, DecodedReply& reply) {
   reply.error.reset();
   reply.results.clear();
   ReplyPass pass(frame, reply, builder_, keyLists_);
-  if (pass.run()) return true;
+  if (pass.run()) return {};
   builder_.reset();
-  reason = pass.trouble();
-  return false;
+  return Error{0, pass.trouble()};
 }
 
 }  // namespace tarn::wire

@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "plist/PackedBuilder.h"
+#include "plist/Result.h"
 #include "plist/Value.h"
 
 namespace tarn::wire {
@@ -34,8 +35,8 @@ class ReplyDecoder {
   ReplyDecoder& operator=(const ReplyDecoder&) = delete;
 
   // Whether the frame is a reply: [id, null or [domain, code, text], results...] with property-list values as results.
-  // When it is not, `reason` says why.
-  bool decode(std::span<const std::byte> frame, DecodedReply& reply, std::string& reason);
+  // The error says why it is not; its number is 0.
+  Status decode(std::span<const std::byte> frame, DecodedReply& reply);
 
  private:
   plist::PackedBuilder builder_;

@@ -16,7 +16,7 @@ namespace tarn::recorder {
 namespace {
 
 constexpr int kBusyMilliseconds = 2000;
-// The pace of looking for changes: quick behind a change, gentle when it stays quiet.
+// The pace of looking for changes: quick after a change, gentle when it stays quiet.
 constexpr std::chrono::milliseconds kFirstLook{2};
 constexpr std::chrono::milliseconds kLastLook{200};
 // What a read may cost, by the bytes of the file and its log. Rows of ours cost far less; a damaged or made-up file may
@@ -52,18 +52,10 @@ void distrust(sqlite3* database, std::int64_t& stepsLeft) {
   sqlite3_progress_handler(database, kStepsAtOnce, spendSteps, &stepsLeft);
 }
 
-EventReader::Result missing(std::string error) {
-  EventReader::Result result;
-  result.status = EventReader::Status::Missing;
-  result.error = std::move(error);
-  return result;
-}
-
-EventReader::Result failed(std::string error) {
-  EventReader::Result result;
-  result.status = EventReader::Status::Failed;
-  result.error = std::move(error);
-  return result;
+Result<EventPage> missing() {
+  Result<EventPage> read;
+  read.value.missing = true;
+  return read;
 }
 
 }  // namespace
@@ -89,7 +81,7 @@ bool EventReader::sameFile(const Identity& now) const noexcept {
   return now.there == opened_.there && now.device == opened_.device && now.inode == opened_.inode;
 }
 
-tarn::Status EventReader::openAs(const std::string& name) {
+Status EventReader::openAs(const std::string& name) {
   if (connection_.open(name, SQLITE_OPEN_READONLY | SQLITE_OPEN_URI) != SQLITE_OK) return lastError();
   sqlite3_busy_timeout(connection_.handle(), kBusyMilliseconds);
   distrust(connection_.handle(), stepsLeft_);
@@ -116,11 +108,11 @@ Error EventReader::lastError() const {
           stepsLeft_ < 0 ? "its tables lead into themselves" : connection_.errorText()};
 }
 
-tarn::Status EventReader::open() {
+Status EventReader::open() {
   opened_ = identity();
   asItLies_ = false;
   dataVersion_ = -1;
-  tarn::Status error = openAs(file_.string());
+  Status error = openAs(file_.string());
   if (error.ok()) return {};
   const auto code = error->code & 0xFF;
   // No index can be made in a directory that can't be written to. Where there is no log either, nobody writes, and the
@@ -134,24 +126,24 @@ tarn::Status EventReader::open() {
   return error;
 }
 
-EventReader::Result EventReader::read(const EventQuery& query) {
+Result<EventPage> EventReader::read(const EventQuery& query) {
   const Identity now = identity();
   if (!now.there) {
     connection_.close();
     if (lastRead_) {
       lastRead_ = Identity();
     }  // whatever comes next is another file, even where it gets the same number
-    return missing("there is no file " + file_.string());
+    return missing();
   }
   if (connection_.isOpen() && !sameFile(now)) {
     connection_.close();
   }
   setBounds();
   if (!connection_.isOpen()) {
-    if (const auto error = open(); error.failed()) return failed(file_.string() + ": " + error->text);
+    if (const auto error = open(); error.failed()) return {{}, about(error->text)};
   }
-  Result result = readOpen(query);
-  if (result.status == Status::Failed) {
+  Result<EventPage> result = readOpen(query);
+  if (result.failed()) {
     connection_.close();
   }
   return result;
@@ -164,26 +156,26 @@ std::int64_t EventReader::startingPoint(std::int64_t after) {
   return std::min(after, begun.value_or(0));
 }
 
-EventReader::Result EventReader::readOpen(const EventQuery& query) {
-  Result result;
+Result<EventPage> EventReader::readOpen(const EventQuery& query) {
+  Result<EventPage> result;
   dataVersion_ = connection_.integer("PRAGMA data_version").value_or(-1);
-  if (connection_.run("BEGIN") != SQLITE_OK) return failed(file_.string() + ": " + lastError().text);
+  if (connection_.run("BEGIN") != SQLITE_OK) return {{}, about(lastError().text)};
   std::int64_t after = query.after;
   const auto tables = connection_.integer(
       "SELECT count(*) FROM sqlite_schema WHERE name = 'events' AND type = 'table' AND rootpage > 0");
   if (tables == 0) {
     static_cast<void>(connection_.run("ROLLBACK"));
-    return missing(file_.string() + " holds no events yet");
+    return missing();
   }
   after = startingPoint(after);
-  const auto error = readRows(query, after, result);
+  const auto error = readRows(query, after, result.value);
   static_cast<void>(connection_.run("ROLLBACK"));
-  if (error.failed()) return failed(file_.string() + ": " + error->text);
+  if (error.failed()) return {{}, about(error->text)};
   lastRead_ = opened_;
   return result;
 }
 
-tarn::Status EventReader::readRows(const EventQuery& query, std::int64_t after, Result& result) {
+Status EventReader::readRows(const EventQuery& query, std::int64_t after, EventPage& page) {
   std::string sql = "SELECT id, time, backend, name, payload, detail FROM events WHERE id > ?1";
   if (query.backend) {
     sql += " AND backend = ?2";
@@ -207,13 +199,13 @@ tarn::Status EventReader::readRows(const EventQuery& query, std::int64_t after, 
       textLeft_ -= static_cast<std::int64_t>(rows.text(column).size());
     }
     if (textLeft_ < 0) return Error{SQLITE_CORRUPT, "its rows say more than it holds"};
-    result.rows.push_back({rows.integer(0), rows.real(1), std::string(rows.text(2)), std::string(rows.text(3)),
-                           std::string(rows.text(4)), std::string(rows.text(5))});
+    page.rows.push_back({rows.integer(0), rows.real(1), std::string(rows.text(2)), std::string(rows.text(3)),
+                         std::string(rows.text(4)), std::string(rows.text(5))});
   }
   if (code != SQLITE_DONE) return lastError();
-  result.more = result.rows.size() == query.limit;
+  page.more = page.rows.size() == query.limit;
   const std::int64_t last = connection_.integer("SELECT max(id) FROM events").value_or(after);
-  result.lookedUpTo = result.more && !result.rows.empty() ? result.rows.back().id : std::max(after, last);
+  page.lookedUpTo = page.more && !page.rows.empty() ? page.rows.back().id : std::max(after, last);
   return {};
 }
 

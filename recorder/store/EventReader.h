@@ -35,28 +35,24 @@ struct EventQuery {
   std::size_t limit = 1000;
 };
 
+// What a query found.
+struct EventPage {
+  bool missing = false;        // there is no file, or none with events in it yet: nothing else is told
+  std::vector<EventRow> rows;  // by ascending id
+  // Where the next query goes on: the id up to which events were looked at. Less than the query's `after` when the
+  // file was replaced by one whose ids start again; its rows are then in this page.
+  std::int64_t lookedUpTo = 0;
+  bool more = false;  // the limit cut it short
+};
+
 class EventReader {
  public:
-  enum class Status : std::uint8_t {
-    Ok,
-    Missing,  // there is no file, or none with events in it yet
-    Failed,
-  };
-  struct Result {
-    Status status = Status::Ok;
-    std::vector<EventRow> rows;  // by ascending id
-    // Where the next query goes on: the id up to which events were looked at. Less than the query's `after` when the
-    // file was replaced by one whose ids begin anew; its rows are then in this result.
-    std::int64_t lookedUpTo = 0;
-    bool more = false;  // the limit cut the result short
-    std::string error;  // when not Ok; names the file
-  };
-
   explicit EventReader(std::filesystem::path file);
   EventReader(const EventReader&) = delete;
   EventReader& operator=(const EventReader&) = delete;
 
-  Result read(const EventQuery& query);
+  // The error names the file.
+  Result<EventPage> read(const EventQuery& query);
   // Waits until something was written since the last read, or until the time is up; whether there is reason to read.
   bool waitForChange(std::chrono::milliseconds timeout);
 
@@ -74,13 +70,14 @@ class EventReader {
   Identity identity() const;
   bool sameFile(const Identity& now) const noexcept;
   bool changed();
-  [[nodiscard]] tarn::Status open();
-  [[nodiscard]] tarn::Status openAs(const std::string& name);
+  [[nodiscard]] Status open();
+  [[nodiscard]] Status openAs(const std::string& name);
   void setBounds();  // of the read that begins
   Error lastError() const;
+  Error about(const std::string& what) const { return {0, file_.string() + ": " + what}; }
   std::int64_t startingPoint(std::int64_t after);
-  Result readOpen(const EventQuery& query);
-  [[nodiscard]] tarn::Status readRows(const EventQuery& query, std::int64_t after, Result& result);
+  Result<EventPage> readOpen(const EventQuery& query);
+  [[nodiscard]] Status readRows(const EventQuery& query, std::int64_t after, EventPage& page);
 
   const std::filesystem::path file_;
   Connection connection_;

@@ -78,15 +78,15 @@ std::vector<Event> ServiceFixture::events(const std::string& nameGlob) {
   recorder::EventReader reader(state() + "/recorder.sqlite3");
   recorder::EventQuery query;
   query.nameGlob = nameGlob;
-  recorder::EventReader::Result result;
+  Result<recorder::EventPage> page;
   do {
-    result = reader.read(query);
-    EXPECT_NE(result.status, recorder::EventReader::Status::Failed) << result.error;
-    for (const auto& row : result.rows) {
+    page = reader.read(query);
+    EXPECT_TRUE(page.ok()) << page.error.text();
+    for (const auto& row : page.value.rows) {
       found.push_back({row.id, row.backend, row.name, json::parse(row.payload), json::parse(row.detail)});
     }
-    query.after = result.lookedUpTo;
-  } while (result.more);
+    query.after = page.value.lookedUpTo;
+  } while (page.value.more);
   return found;
 }
 

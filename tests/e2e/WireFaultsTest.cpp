@@ -42,8 +42,7 @@ class WireFaults : public ServiceFixture {
     const std::string frame = socket.receiveFrame();
     wire::ReplyDecoder decoder;
     wire::DecodedReply reply;
-    std::string reason;
-    if (frame.empty() || !decoder.decode(std::as_bytes(std::span(frame)), reply, reason)) return -1;
+    if (frame.empty() || decoder.decode(std::as_bytes(std::span(frame)), reply).failed()) return -1;
     if (!reply.error) return 0;
     EXPECT_EQ(reply.error->domain, "sys.oxbow.audio.reporting.ipc");
     return reply.error->code;

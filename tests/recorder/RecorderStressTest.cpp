@@ -51,13 +51,13 @@ TEST_F(RecorderStress, TheAccountIsRightAtAnyMomentAndNothingIsLost) {
     EventQuery query;
     std::size_t seen = 0;
     while (!done || seen < std::size_t{kThreads} * kEvents) {
-      const EventReader::Result result = events.read(query);
-      ASSERT_NE(result.status, EventReader::Status::Failed) << result.error;
-      for (const EventRow& row : result.rows) {
+      const Result<EventPage> page = events.read(query);
+      ASSERT_TRUE(page.ok()) << page.error.text();
+      for (const EventRow& row : page.value.rows) {
         ASSERT_EQ(row.id, static_cast<std::int64_t>(++seen));
       }
-      query.after = result.lookedUpTo;
-      if (result.rows.empty()) {
+      query.after = page.value.lookedUpTo;
+      if (page.value.rows.empty()) {
         events.waitForChange(std::chrono::milliseconds(50));
       }
     }

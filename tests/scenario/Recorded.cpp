@@ -33,17 +33,15 @@ std::vector<RecordedEvent> recordedEvents(const std::string& stateDirectory, std
   recorder::EventReader reader(stateDirectory + "/recorder.sqlite3");
   recorder::EventQuery query;
   query.after = after;
-  recorder::EventReader::Result result;
+  Result<recorder::EventPage> page;
   do {
-    result = reader.read(query);
-    if (result.status == recorder::EventReader::Status::Failed) {
-      throw std::runtime_error("can't read the recorder: " + result.error);
-    }
-    for (const recorder::EventRow& row : result.rows) {
+    page = reader.read(query);
+    if (page.failed()) throw std::runtime_error("can't read the recorder: " + page.error->text);
+    for (const recorder::EventRow& row : page.value.rows) {
       events.push_back({row.id, row.backend, row.name, json::parse(row.payload), json::parse(row.detail)});
     }
-    query.after = result.lookedUpTo;
-  } while (result.more);
+    query.after = page.value.lookedUpTo;
+  } while (page.value.more);
   return events;
 }
 

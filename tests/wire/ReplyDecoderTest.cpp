@@ -20,7 +20,9 @@ struct Decoded {
 Decoded decode(std::string_view hex) {
   ReplyDecoder decoder;
   Decoded decoded;
-  decoded.good = decoder.decode(asBytes(fromHex(hex)), decoded.reply, decoded.reason);
+  const Status read = decoder.decode(asBytes(fromHex(hex)), decoded.reply);
+  decoded.good = read.ok();
+  decoded.reason = read.text();
   return decoded;
 }
 
@@ -43,10 +45,9 @@ TEST(ReplyDecoder, RefusedDictionariesLeaveNoMemoryBehind) {
     const std::string frame = fromHex(hex);
     ReplyDecoder decoder;
     DecodedReply reply;
-    std::string reason;
     const testing::HeapGrowth heap;
     for (int i = 0; i < 20'000; ++i) {
-      ASSERT_FALSE(decoder.decode(asBytes(frame), reply, reason));
+      ASSERT_TRUE(decoder.decode(asBytes(frame), reply).failed());
     }
     EXPECT_LT(heap.bytes(), 16'384) << hex;
   }
@@ -124,16 +125,15 @@ TEST(ReplyDecoder, RefusesWhatIsNoReplyAndSaysWhy) {
 TEST(ReplyDecoder, AnUnreadableReplyLeavesNothingForTheNext) {
   ReplyDecoder decoder;
   DecodedReply reply;
-  std::string reason;
   const std::string bad = fromHex(
       "8407f6"
       "05"
       "8281a1616105f6");
-  EXPECT_FALSE(decoder.decode(asBytes(bad), reply, reason));
+  EXPECT_TRUE(decoder.decode(asBytes(bad), reply).failed());
   const std::string good = fromHex(
       "8308f6"
       "8101");
-  ASSERT_TRUE(decoder.decode(asBytes(good), reply, reason));
+  ASSERT_TRUE(decoder.decode(asBytes(good), reply).ok());
   EXPECT_EQ(reply.id, 8U);
   ASSERT_EQ(reply.results.size(), 1U);
   EXPECT_EQ(reply.results[0], plist::Value(plist::Array{1}));
@@ -142,11 +142,12 @@ TEST(ReplyDecoder, AnUnreadableReplyLeavesNothingForTheNext) {
 TEST(ReplyDecoder, NothingOfAnEarlierReplyRemains) {
   ReplyDecoder decoder;
   DecodedReply reply;
-  std::string reason;
-  ASSERT_TRUE(decoder.decode(asBytes(fromHex("8307"
-                                             "83616101616205")),
-                             reply, reason));
-  ASSERT_TRUE(decoder.decode(asBytes(fromHex("8208f6")), reply, reason));
+  ASSERT_TRUE(decoder
+                  .decode(asBytes(fromHex("8307"
+                                          "83616101616205")),
+                          reply)
+                  .ok());
+  ASSERT_TRUE(decoder.decode(asBytes(fromHex("8208f6")), reply).ok());
   EXPECT_EQ(reply.id, 8U);
   EXPECT_FALSE(reply.error.has_value());
   EXPECT_TRUE(reply.results.empty());

@@ -285,8 +285,8 @@ TEST(RequestDecoder, WhatIsNotWellFormedIsUnreadableHoweverDeepAndWhateverElseIs
            "840704bf616bff01",              // a key without a value
            "840704a2616bf6616a1c01",        // null first, then a reserved head
            "8307ff01", "830718ff", "8218",  // in the frame itself
-           "83070cfe",                      // behind an unknown operation
-           "84070102fc",                    // behind a wrong count
+           "83070cfe",                      // after an unknown operation
+           "84070102fc",                    // after a wrong count
        }) {
     EXPECT_TRUE(decodeHex(hex).unreadable()) << hex;
   }

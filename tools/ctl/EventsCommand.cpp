@@ -85,21 +85,21 @@ int EventPrinter::print() {
 
 bool EventPrinter::printNew() {
   recorder::EventQuery query = arguments_.query;
-  EventReader::Result result;
+  Result<recorder::EventPage> page;
   do {
     query.after = after_;
-    result = reader_.read(query);
-    if (result.status == EventReader::Status::Failed) {
-      complain("can't read " + result.error);
+    page = reader_.read(query);
+    if (page.failed()) {
+      complain("can't read " + page.error->text);
       return false;
     }
-    isMissing_ = result.status == EventReader::Status::Missing;
+    isMissing_ = page.value.missing;
     if (isMissing_) return true;
-    for (const recorder::EventRow& row : result.rows) {
+    for (const recorder::EventRow& row : page.value.rows) {
       printRow(row);
     }
-    after_ = result.lookedUpTo;
-  } while (result.more && output_.good() && stopRequested == 0);
+    after_ = page.value.lookedUpTo;
+  } while (page.value.more && output_.good() && stopRequested == 0);
   return true;
 }
 

@@ -58,8 +58,7 @@ std::optional<wire::DecodedReply> TestClient::reply() {
   std::string body(length, '\0');
   if (!receive(body.data(), body.size())) return std::nullopt;
   wire::DecodedReply reply;
-  std::string reason;
-  if (!decoder_.decode(std::as_bytes(std::span(body)), reply, reason)) return std::nullopt;
+  if (decoder_.decode(std::as_bytes(std::span(body)), reply).failed()) return std::nullopt;
   return reply;
 }
 

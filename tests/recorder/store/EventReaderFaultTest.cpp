@@ -7,8 +7,6 @@
 namespace tarn::recorder {
 namespace {
 
-using Status = EventReader::Status;
-
 constexpr const char* kEvents =
     "PRAGMA page_size = 512;"
     "CREATE TABLE events(id INTEGER PRIMARY KEY, time REAL, backend TEXT, name TEXT, payload TEXT, detail TEXT);"
@@ -45,7 +43,7 @@ class EventReaderFaultTest : public RecorderFixture {
     }
     return page;
   }
-  // The table of two events behind `levels` levels of pages, each of which names the next one 61 times.
+  // The table of two events after `levels` levels of pages, each of which names the next one 61 times.
   void writeLeadingIntoItself(std::size_t levels) {
     change(file(), std::string(kEvents) + "CREATE TABLE room(bytes BLOB); INSERT INTO room VALUES(zeroblob(8192));");
     std::string bytes = contents();
@@ -64,9 +62,9 @@ TEST_F(EventReaderFaultTest, AViewThatNeverEndsIsNoTableOfEvents) {
   change(file(),
          "CREATE VIEW events AS WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n)"
          " SELECT i AS id, 0 AS time, 'tally' AS backend, '' AS name, '' AS payload, '' AS detail FROM n");
-  const EventReader::Result result = EventReader(file()).read({});
-  EXPECT_EQ(result.status, Status::Missing);
-  EXPECT_EQ(result.error, file().string() + " holds no events yet");
+  const Result<EventPage> result = EventReader(file()).read({});
+  EXPECT_TRUE(result.ok());
+  EXPECT_TRUE(result.value.missing);
 }
 
 TEST_F(EventReaderFaultTest, ColumnsThatAreComputedSayNoMoreThanTheFileHolds) {
@@ -74,10 +72,10 @@ TEST_F(EventReaderFaultTest, ColumnsThatAreComputedSayNoMoreThanTheFileHolds) {
          "CREATE TABLE events(id INTEGER PRIMARY KEY, time REAL, backend TEXT, name TEXT,"
          " payload TEXT AS (hex(zeroblob(1000000))), detail TEXT);"
          "INSERT INTO events(name) VALUES('one');");
-  const EventReader::Result result = EventReader(file()).read({});
-  EXPECT_EQ(result.status, Status::Failed);
-  EXPECT_TRUE(result.rows.empty());
-  EXPECT_EQ(result.error, file().string() + ": its rows say more than it holds");
+  const Result<EventPage> result = EventReader(file()).read({});
+  ASSERT_TRUE(result.failed());
+  EXPECT_TRUE(result.value.rows.empty());
+  EXPECT_EQ(result.error->text, file().string() + ": its rows say more than it holds");
 }
 
 TEST_F(EventReaderFaultTest, PagesThatNameOnePageOftenAreGivenUp) {
@@ -85,9 +83,9 @@ TEST_F(EventReaderFaultTest, PagesThatNameOnePageOftenAreGivenUp) {
   const std::string before = contents();
   EventQuery query;
   query.backend = "none";
-  const EventReader::Result result = EventReader(file()).read(query);
-  EXPECT_EQ(result.status, Status::Failed);
-  EXPECT_EQ(result.error, file().string() + ": its tables lead into themselves");
+  const Result<EventPage> result = EventReader(file()).read(query);
+  ASSERT_TRUE(result.failed());
+  EXPECT_EQ(result.error->text, file().string() + ": its tables lead into themselves");
   EXPECT_EQ(contents(), before);
 }
 
@@ -96,10 +94,10 @@ TEST_F(EventReaderFaultTest, AReaderThatGaveUpReadsTheMendedFile) {
   EventReader reader(file());
   EventQuery query;
   query.backend = "none";
-  ASSERT_EQ(reader.read(query).status, Status::Failed);
+  ASSERT_TRUE(reader.read(query).failed());
   std::filesystem::remove(file());
   change(file(), kEvents);
-  EXPECT_EQ(reader.read({}).rows.size(), 2U);
+  EXPECT_EQ(reader.read({}).value.rows.size(), 2U);
 }
 
 }  // namespace

@@ -8,13 +8,11 @@
 namespace tarn::recorder {
 namespace {
 
-using Status = EventReader::Status;
-
 class EventReaderTest : public RecorderFixture {
  protected:
-  static std::vector<std::string> names(const EventReader::Result& result) {
+  static std::vector<std::string> names(const Result<EventPage>& result) {
     std::vector<std::string> all;
-    for (const EventRow& row : result.rows) {
+    for (const EventRow& row : result.value.rows) {
       all.push_back(row.name);
     }
     return all;
@@ -31,10 +29,10 @@ TEST_F(EventReaderTest, RowsCarryEveryColumn) {
   recorder_->record("wattlog", "audio", {{"a", 1}}, {{"agent", 28}}, 1750000000.5);
   ASSERT_TRUE(flush());
   EventReader reader(file());
-  const EventReader::Result result = reader.read({});
-  ASSERT_EQ(result.status, Status::Ok) << result.error;
-  ASSERT_EQ(result.rows.size(), 1U);
-  const EventRow& row = result.rows.front();
+  const Result<EventPage> result = reader.read({});
+  ASSERT_TRUE(result.ok()) << result.error.text();
+  ASSERT_EQ(result.value.rows.size(), 1U);
+  const EventRow& row = result.value.rows.front();
   EXPECT_EQ(row.id, 1);
   EXPECT_EQ(row.time, 1750000000.5);
   EXPECT_EQ(row.backend, "wattlog");
@@ -67,13 +65,13 @@ TEST_F(EventReaderTest, LimitCutsAndTheNextQueryGoesOn) {
   EventReader reader(file());
   EventQuery query;
   query.limit = 3;
-  const EventReader::Result first = reader.read(query);
+  const Result<EventPage> first = reader.read(query);
   EXPECT_EQ(names(first), (Names{"event0", "event1", "event2"}));
-  EXPECT_TRUE(first.more);
-  query.after = first.lookedUpTo;
-  const EventReader::Result second = reader.read(query);
+  EXPECT_TRUE(first.value.more);
+  query.after = first.value.lookedUpTo;
+  const Result<EventPage> second = reader.read(query);
   EXPECT_EQ(names(second), (Names{"event3", "event4"}));
-  EXPECT_FALSE(second.more);
+  EXPECT_FALSE(second.value.more);
 }
 
 TEST_F(EventReaderTest, EventsThatDoNotMatchAreNotLookedAtAgain) {
@@ -83,12 +81,12 @@ TEST_F(EventReaderTest, EventsThatDoNotMatchAreNotLookedAtAgain) {
   EventReader reader(file());
   EventQuery query;
   query.nameGlob = "none*";
-  EXPECT_EQ(reader.read(query).lookedUpTo, 5);
+  EXPECT_EQ(reader.read(query).value.lookedUpTo, 5);
 }
 
 TEST_F(EventReaderTest, AMissingFileIsToldAndIsReadOnceItIsThere) {
   EventReader reader(file());
-  EXPECT_EQ(reader.read({}).status, Status::Missing);
+  EXPECT_TRUE(reader.read({}).value.missing);
   EXPECT_FALSE(reader.waitForChange(std::chrono::milliseconds(1)));
   start();
   record("a");
@@ -100,15 +98,15 @@ TEST_F(EventReaderTest, AMissingFileIsToldAndIsReadOnceItIsThere) {
 TEST_F(EventReaderTest, AnEmptyFileHoldsNoEventsYet) {
   std::ofstream(file()).flush();
   EventReader reader(file());
-  EXPECT_EQ(reader.read({}).status, Status::Missing);
+  EXPECT_TRUE(reader.read({}).value.missing);
 }
 
 TEST_F(EventReaderTest, AFileThatIsNoDatabaseIsAFailure) {
   std::ofstream(file()) << std::string(10'000, 'g');
   EventReader reader(file());
-  const EventReader::Result result = reader.read({});
-  EXPECT_EQ(result.status, Status::Failed);
-  EXPECT_NE(result.error.find("not a database"), std::string::npos) << result.error;
+  const Result<EventPage> result = reader.read({});
+  ASSERT_TRUE(result.failed());
+  EXPECT_NE(result.error->text.find("not a database"), std::string::npos) << result.error->text;
 }
 
 TEST_F(EventReaderTest, WaitsUntilSomethingIsWritten) {
@@ -117,7 +115,7 @@ TEST_F(EventReaderTest, WaitsUntilSomethingIsWritten) {
   ASSERT_TRUE(flush());
   EventReader reader(file());
   EventQuery query;
-  query.after = reader.read(query).lookedUpTo;
+  query.after = reader.read(query).value.lookedUpTo;
   EXPECT_FALSE(reader.waitForChange(std::chrono::milliseconds(30)));
   record("b");
   EXPECT_TRUE(reader.waitForChange(kPatience));
@@ -130,7 +128,7 @@ TEST_F(EventReaderTest, FollowsAcrossARunOfTheService) {
   stop();
   EventReader reader(file());
   EventQuery query;
-  query.after = reader.read(query).lookedUpTo;
+  query.after = reader.read(query).value.lookedUpTo;
   start();
   record("b");
   ASSERT_TRUE(flush());
@@ -144,14 +142,14 @@ TEST_F(EventReaderTest, FollowsIntoAFileWhoseIdsGoOn) {
   ASSERT_TRUE(flush());
   EventReader reader(file());
   EventQuery query;
-  query.after = reader.read(query).lookedUpTo;
+  query.after = reader.read(query).value.lookedUpTo;
   std::filesystem::rename(file(), directory_.path() / "elsewhere");
   record("after");
   ASSERT_TRUE(flush());
   EXPECT_TRUE(reader.waitForChange(kPatience));
-  const EventReader::Result result = reader.read(query);
+  const Result<EventPage> result = reader.read(query);
   EXPECT_EQ(names(result), Names{"after"});
-  EXPECT_EQ(result.lookedUpTo, 6);
+  EXPECT_EQ(result.value.lookedUpTo, 6);
 }
 
 TEST_F(EventReaderTest, FollowsIntoAFileWhoseIdsBeginAnew) {
@@ -160,19 +158,19 @@ TEST_F(EventReaderTest, FollowsIntoAFileWhoseIdsBeginAnew) {
   ASSERT_TRUE(flush());
   EventReader reader(file());
   EventQuery query;
-  query.after = reader.read(query).lookedUpTo;
+  query.after = reader.read(query).value.lookedUpTo;
   ASSERT_EQ(query.after, 5);
   stop();
   for (const char* const suffix : {"", "-wal", "-shm", ".counts"}) {
     std::filesystem::remove(file().string() + suffix);
   }
-  EXPECT_EQ(reader.read(query).status, Status::Missing);
+  EXPECT_TRUE(reader.read(query).value.missing);
   start();
   record("anew");
   ASSERT_TRUE(flush());
-  const EventReader::Result result = reader.read(query);
+  const Result<EventPage> result = reader.read(query);
   EXPECT_EQ(names(result), Names{"anew"});
-  EXPECT_EQ(result.lookedUpTo, 1);
+  EXPECT_EQ(result.value.lookedUpTo, 1);
 }
 
 TEST_F(EventReaderTest, AFailureInBetweenRepeatsNothing) {
@@ -181,12 +179,12 @@ TEST_F(EventReaderTest, AFailureInBetweenRepeatsNothing) {
   stop();
   EventReader reader(file());
   EventQuery query;
-  query.after = reader.read(query).lookedUpTo;
+  query.after = reader.read(query).value.lookedUpTo;
   change(file(), "ALTER TABLE events RENAME COLUMN name TO other");
-  EXPECT_EQ(reader.read(query).status, Status::Failed);
+  EXPECT_TRUE(reader.read(query).failed());
   change(file(), "ALTER TABLE events RENAME COLUMN other TO name");
-  const EventReader::Result result = reader.read(query);
-  EXPECT_EQ(result.status, Status::Ok) << result.error;
+  const Result<EventPage> result = reader.read(query);
+  EXPECT_TRUE(result.ok()) << result.error.text();
   EXPECT_EQ(names(result), Names{});
 }
 
@@ -198,8 +196,8 @@ TEST_F(EventReaderTest, ReadsADirectoryThatItMayNotWriteTo) {
     stop();
     ASSERT_EQ(::chmod(directory_.path().c_str(), 0555), 0);
     EventReader reader(file());
-    const EventReader::Result result = reader.read({});
-    EXPECT_EQ(result.status, Status::Ok) << result.error;
+    const Result<EventPage> result = reader.read({});
+    EXPECT_TRUE(result.ok()) << result.error.text();
     EXPECT_EQ(names(result), Names{"a"});
     EXPECT_FALSE(reader.waitForChange(std::chrono::milliseconds(30)));
     ASSERT_EQ(::chmod(directory_.path().c_str(), 0755), 0);
@@ -216,7 +214,7 @@ TEST_F(EventReaderTest, FollowsFromADirectoryThatItMayNotWriteToWhenTheServiceSt
     ASSERT_EQ(::chmod(directory_.path().c_str(), 0555), 0);
     EventReader reader(file());
     EventQuery query;
-    query.after = reader.read(query).lookedUpTo;
+    query.after = reader.read(query).value.lookedUpTo;
     ASSERT_EQ(::chmod(directory_.path().c_str(), 0755), 0);
     start();
     record("b");
