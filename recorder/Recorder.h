@@ -66,7 +66,7 @@ class Recorder {
   void shutdown();
 
   // Hands an event over, before start() too; `backend` must be a text that lives for ever, `time` is in epoch seconds.
-  // Behind shutdown() the event counts as failed. Threads: any.
+  // After shutdown() the event counts as failed. Threads: any.
   void record(std::string_view backend, std::string_view name, plist::Dictionary payload, plist::Dictionary detail,
               double time);
   // Whether events should not be brought in for now: too many wait, or the oldest for too long. Threads: any.

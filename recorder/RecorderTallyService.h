@@ -19,7 +19,7 @@ class Recorder;
 
 class RecorderTallyService : public platform::TallyService {
  public:
-  // Names whose answers are remembered; when there are more, all are forgotten and asked for anew.
+  // Names whose answers are remembered; when there are more, all are forgotten and asked for again.
   static constexpr std::size_t kRememberedNames = 4096;
   // Longer names are never remembered.
   static constexpr std::size_t kLongestRememberedName = 256;

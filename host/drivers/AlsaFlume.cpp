@@ -46,7 +46,7 @@ const char* groupOf(const AlsaInfo& info) {
   return isDigitalLink(info.id) ? "Rx" : "Speaker";
 }
 
-// How far a counter went that may have begun anew.
+// How far a counter went that may have started again.
 std::uint64_t steps(const std::optional<std::uint64_t>& before, const std::optional<std::uint64_t>& now) {
   if (!now) return 0;
   return before && *before <= *now ? *now - *before : *now;

@@ -14,7 +14,7 @@
 //
 // The kernel tells the state of now, so everything is summed up here from reading to reading, and is as fine as these
 // are. A state that is new holds since the trigger time that the kernel tells, and the state before until then; what
-// came and went between two readings is not seen. A pointer or counter that fell began anew. Of a kernel without a
+// came and went between two readings is not seen. A pointer or counter that fell started again. Of a kernel without a
 // counter of overruns, each reading that finds the substream newly in the state XRUN counts as one.
 //
 // A substream that can't be read is one complaint in the log until it changes, and is left out. A machine without sound

@@ -1,6 +1,6 @@
 // FlumeFiles: driver report channels in files, one driver each: the plain files "*.json" of a folder (see FlumeFile).
 //
-// Every reading looks at the folder and the files anew, in the order of their names, so drivers may write, replace and
+// Every reading looks at the folder and the files again, in the order of their names, so drivers may write, replace and
 // remove them at any time. A file that can't be read or is broken is one complaint in the log, and the others count.
 // A complaint is logged when it is new, not with every reading: sessions come and go by the thousand. What becomes a
 // complaint: a file that is no plain one, too large, half-written or wrong (whole or one of its channels), a file that

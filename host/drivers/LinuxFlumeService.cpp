@@ -47,7 +47,7 @@ std::int64_t difference(std::int64_t later, std::int64_t earlier) {
   return result;
 }
 
-// A count that fell began anew in between.
+// A count that fell started again in between.
 template <class Count>
 Count grown(Count later, Count earlier) {
   return later < earlier ? later : later - earlier;

@@ -1,6 +1,6 @@
 // LinuxFlumeService: the driver report channels of all sources as one service.
 //
-// Every look-up and every sample reads the sources anew. A channel is known by driver, group, sub-group and name; of
+// Every look-up and every sample reads the sources again. A channel is known by driver, group, sub-group and name; of
 // two that are known alike the one of the earlier source counts. It never fails: what a source can't read is missing,
 // and the source says so in the log.
 //

@@ -33,7 +33,7 @@ class JournalOutput final : public LogOutput {
   [[nodiscard]] Status open();
 
   std::string formed(double epochSeconds, const platform::LogEntry& entry) const override;
-  // A journal that was started anew is found again.
+  // A journal that was started again is found again.
   int write(std::string_view bytes) override;
 
  private:

@@ -25,7 +25,7 @@ class LineOutput : public LogOutput {
 
   // Where the next bytes go, or a negative errno value.
   virtual int descriptor() = 0;
-  // Of another descriptor than before: a line that was begun there is begun anew.
+  // Of another descriptor than before: a line that was begun there is started again.
   void beginAnew() noexcept { written_ = 0; }
   // For a descriptor other than a file's: it may be full for as long as its reader likes.
   void setMayStall(bool mayStall) noexcept { mayStall_ = mayStall; }

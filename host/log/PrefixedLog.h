@@ -1,5 +1,5 @@
 // logPrefixed: the log lines of the host's own parts (loop, listener, connections) in the form of all others: the text
-// stands behind the prefix "%25s:%-5d " (module, line). Threads: any.
+// stands after the prefix "%25s:%-5d " (module, line). Threads: any.
 #pragma once
 
 #include <string>

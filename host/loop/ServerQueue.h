@@ -2,7 +2,7 @@
 // for the sockets.
 //
 // Which problem: work comes from the loop's own thread (requests), and now and then from others (back-ends, timers), up
-// to thousands of pieces a millisecond; waking a sleeping thread is dear. How: one list under a lock, taken over whole
+// to thousands of pieces a millisecond; waking a sleeping thread costs. How: one list under a lock, taken over whole
 // by the serving thread; the descriptor that wakes the loop is written only when the loop has said that it goes to
 // sleep.
 //

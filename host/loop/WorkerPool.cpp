@@ -66,7 +66,7 @@ void WorkerPool::stop() {
 
 // Work holds its queue as a rule, and the queue holds its work: nobody else would ever let go of either.
 void WorkerPool::destroyWhatIsLeft() {
-  // Destroyed behind the lock: its end may come back here.
+  // Destroyed after the lock: its end may come back here.
   std::vector<platform::Work> left;
   DelayedWork<Delayed> delayed;
   const MutexLock lock(mutex_);
@@ -134,7 +134,7 @@ void WorkerPool::help(const std::shared_ptr<Line>& line, nanoseconds longest) {
   }
 }
 
-// A line with unfinished work stands in the pool's line, is run or is suspended. Each gets a piece behind what it has.
+// A line with unfinished work stands in the pool's line, is run or is suspended. Each gets a piece after what it has.
 void WorkerPool::afterWhatIsUnfinished(platform::Work done) {
   struct Barrier {
     std::atomic<std::size_t> left;

@@ -5,7 +5,7 @@
 // of pieces without the pool's lock, then the queue goes to the end of the line. Delayed work and the ends of
 // suspensions are kept by the pool and handed to their queues at their moments.
 //
-// Which problem: the server queue hands over a piece for every message, and waking a thread is dearer than the piece.
+// Which problem: the server queue hands over a piece for every message, and waking a thread costs more than it.
 // How: a thread that runs out of work looks again by itself after half a millisecond before it goes to sleep; while one
 // is about to look, nobody is woken. Whoever finds more than it can do alone wakes another. Work that is urgent ends
 // the look at once.

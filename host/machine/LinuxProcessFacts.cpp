@@ -71,7 +71,7 @@ std::string firstArgumentName(const std::string& processFolder) {
   return std::string(baseName(std::string_view(arguments).substr(0, arguments.find('\0'))));
 }
 
-// The bytes behind "NAME:" in /proc/self/status, where they are told in kB.
+// The bytes after "NAME:" in /proc/self/status, where they are told in kB.
 std::optional<std::uint64_t> statusBytes(std::string_view status, std::string_view name) {
   const std::string line = "\n" + std::string(name) + ":";
   const std::size_t at = status.find(line);

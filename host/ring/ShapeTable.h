@@ -45,7 +45,7 @@ class ShapeTable {
     std::uint16_t type = 0;
     wire::ReporterIDs reporterIDs;
     std::vector<ShapeKind> kinds;
-    plist::KeyList keys;  // with that of the stamp behind them when it is added
+    plist::KeyList keys;  // with that of the stamp after them when it is added
     bool addsStamp = false;
   };
 

@@ -3,7 +3,7 @@
 // One write to a file is one post, by whatever process, this one included; so is another file taking its name. Each
 // registration's handler is handed to its queue. Posts that come while a delivery still waits there are delivered with
 // it, so a flood of posts costs one piece of work a registration. When the kernel lost count of the changes, every
-// registration is called once. A folder that vanishes is made anew; after that every registration is called once as
+// registration is called once. A folder that vanishes is made again; after that every registration is called once as
 // well.
 //
 // Which problem cancel() solves on the queue: the delivery that already waits there finds its registration cancelled.

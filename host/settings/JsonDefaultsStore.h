@@ -1,6 +1,6 @@
 // JsonDefaultsStore: the defaults store as one JSON file a suite or application domain, defaults/SUITE.json.
 //
-//   - A read sees what any process has written: the file is looked at each time and read anew when it has changed.
+//   - A read sees what any process has written: the file is looked at each time and read again when it has changed.
 //   - A write replaces the file whole, on disk before it returns, and reads it first under a lock that all writers
 //   take,
 //     so that writers of different keys lose nothing. A writer waits for the lock, but not longer than it is told to.

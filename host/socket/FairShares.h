@@ -1,15 +1,15 @@
 // FairShares: whose request is served next, when many connections have some.
 //
-// Which problem: a request can cost a microsecond or a second, and who sends many or dear ones must not hold up the
+// Which problem: a request can cost a microsecond or a second, and who sends many or costly ones must not hold up the
 // others. How: deficit round robin over the cost of what was done, first among users, then among a user's connections.
 //
 //   [user] [user] [user]            each visit: credit += kQuantum, served while it lasts
 //     |
 //     '- [seat] [seat] [seat]       each turn:  credit += kQuantum, one takeTurn() when that made it positive
 //
-// Who spent more than its credit waits until further visits have paid for it, so that one dear piece costs its sender
+// Who spent more than its credit waits until further visits have paid for it, so that one costly piece costs its sender
 // as many turns as many cheap ones. A seat is there only while its holder has something to do; when it is the only one
-// it is served on and on. Who comes anew and owes nothing is served ahead of the user's others, so that a request now
+// it is served on and on. Who comes back and owes nothing is served ahead of the user's others, so that a request now
 // and then doesn't wait for a thousand connections that are busy all the time; every few turns one of those is served.
 //
 // Owned by ConnectionHost. Threads: the main loop's.
@@ -85,7 +85,7 @@ class FairShares {
   static constexpr std::int64_t kQuantum = 32;
   // Nobody pays for more than this that was spent before.
   static constexpr std::int64_t kMostDebt = 64 * kQuantum;
-  // Turns of those that came anew, after which one of the others is served.
+  // Turns of those that came back, after which one of the others is served.
   static constexpr int kFreshTurns = 4;
 
   FairShares() = default;

@@ -79,7 +79,7 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
     return std::move(reading_);
   }
 
-  // The parser takes a NUL between values for the end and would pass over what stands behind it.
+  // The parser takes a NUL between values for the end and would pass over what stands after it.
   void refuseNul() {
     if (const std::size_t nul = text_.find('\0'); nul != std::string_view::npos && !reading_.fault) {
       failAt(nul + 1, "a NUL is not allowed here");

@@ -26,7 +26,7 @@ class SignpostBuffer {
  public:
   struct Content {
     std::vector<SignpostRecord> records;  // in the order in which they were taken
-    std::uint64_t lost = 0;               // how many found no room behind them
+    std::uint64_t lost = 0;               // how many found no room after them
   };
 
   // Takes what happens from `since` on. `halfFull` is called each time the buffer has become so, on the thread that

@@ -26,7 +26,7 @@ class TraceThread {
 
   // Whether the thread runs; starts it when it doesn't yet.
   [[nodiscard]] bool run();
-  // Has something done; nothing any more behind end().
+  // Has something done; nothing any more after end().
   void post(Verb verb, std::shared_ptr<TraceRecording> recording);
   // Ends all traces without callbacks, and the thread.
   void end();

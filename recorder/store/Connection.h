@@ -35,7 +35,7 @@ class Connection {
   // The same, telling a failure from nothing: no row is a failure too, NULL is 0 or an empty text.
   [[nodiscard]] Result<std::int64_t> readInteger(const char* sql);
   [[nodiscard]] Result<std::string> readText(const char* sql);
-  // The failure behind a result code, under that code and with the text of the last one; nothing when it is none.
+  // What a result code says, under that code and with the text of the last one; nothing when it is none.
   [[nodiscard]] Status errorOf(int code) const;
   // Ends a transaction that still stands: many faults end it by themselves.
   void rollback() noexcept;

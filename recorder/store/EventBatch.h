@@ -1,7 +1,7 @@
 // EventBatch: events in the order of their hand-over, as the clients' thread leaves them for the writer.
 //
 // Which problem: handing an event over must cost next to nothing. Dictionaries come by reference count and the names
-// lie one behind the other in one text, so once a batch has grown to its usual size an event allocates nothing. Owner:
+// lie one after the other in one text, so once a batch has grown to its usual size an event allocates nothing. Owner:
 // the recorder, which swaps two of them. Threads: one at a time.
 #pragma once
 
@@ -26,7 +26,7 @@ class EventBatch {
     plist::Dictionary detail;
   };
 
-  // Adds an event; returns the bytes that it is counted for. A payload shared with the event before costs nothing anew.
+  // Adds an event; returns the bytes that it is counted for. A payload shared with the event before costs nothing more.
   std::size_t add(std::string_view backend, std::string_view name, plist::Dictionary payload, plist::Dictionary detail,
                   double time);
   void clear() noexcept;

@@ -132,7 +132,7 @@ Status EventFile::openConnection() {
   const Result<std::int64_t> bytes = connection_.readInteger("PRAGMA page_size");
   pageBytes_ = bytes.value;
   if (bytes.failed()) return bytes.error;
-  // A log that is begun anew is cut to this.
+  // A log that is started again is cut to this.
   const std::string limit = "PRAGMA journal_size_limit=" + std::to_string(2 * logLimit_);
   return connection_.errorOf(connection_.run(limit.c_str()));
 }

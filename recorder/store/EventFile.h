@@ -86,7 +86,7 @@ class EventFile {
   std::vector<std::string> takePutAside() noexcept { return std::exchange(putAside_, {}); }
 
   // Compares rows with their checksums, from where it stopped until the deadline. Nothing when all is well so far;
-  // damage as an error. A reading error too; then the check begins anew.
+  // damage as an error. A reading error too; then the check starts again.
   [[nodiscard]] Status verify(std::chrono::steady_clock::time_point deadline);
   bool isVerified() const noexcept { return check_.isDone(); }
 
@@ -98,7 +98,7 @@ class EventFile {
   // What the database may take, and how large its log grows before it is brought in.
   void setMaxBytes(std::int64_t maxBytes) noexcept { retention_.setMaxBytes(maxBytes); }
   void setLogLimit(std::int64_t bytes) noexcept { logLimit_ = bytes; }
-  // Of the log, which a reader that holds on to an old state keeps from beginning anew.
+  // Of the log, which a reader that holds on to an old state keeps from starting again.
   std::int64_t logBytes() const noexcept { return logBytes_; }
   // Brings the write-ahead log into the database when it has grown large enough.
   [[nodiscard]] Status checkpointIfDue();

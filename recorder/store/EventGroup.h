@@ -3,7 +3,7 @@
 //
 // Which problem: a checksum beside each row would cost a row of its own or a column that everybody sees; one for a
 // whole commit couldn't tell which of its events is damaged. How: one row holds the checksums of up to 64 events, and
-// one of itself behind them.
+// one of itself after them.
 //
 //   hashes: 8 bytes (little-endian) an event, then 8 bytes over `first`, `seconds` and those before
 //

@@ -29,7 +29,7 @@ bool notAfter(std::string_view a, std::string_view b) noexcept {
 }
 
 struct SetMatch {
-  std::size_t end = kNone;  // behind the closing bracket; kNone when the set is never closed
+  std::size_t end = kNone;  // after the closing bracket; kNone when the set is never closed
   bool matches = false;
 };
 

@@ -2,7 +2,7 @@
 // outlives the process however it ends. The next run reads from it how many were lost.
 //
 // Counting is a store to memory. When the file can't be made or mapped, nothing is kept. A file that is cut meanwhile
-// is mapped anew by the next keep(). Threads: one at a time.
+// is mapped again by the next keep(). Threads: one at a time.
 #pragma once
 
 #include <cstddef>

@@ -2,7 +2,7 @@
 //
 // Which problem: touching a page beyond a file's end is answered with SIGBUS, and SQLite maps the index of its log,
 // which any process with the right to write can cut. How: a guarded range gets zeros in place of what isn't there any
-// more, and is known to be torn from then on; whoever owns it looks, and maps it anew. Other SIGBUS go where they went.
+// more, and is known to be torn from then on; whoever owns it looks and maps it again. Other SIGBUS go where they went.
 //
 // SQLite's own mappings are guarded from guardSqlite() on. Threads: any.
 #pragma once

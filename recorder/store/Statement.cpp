@@ -15,7 +15,7 @@ void Statement::finalize() noexcept {
   statement_ = nullptr;
 }
 
-// A binding fails only for a place that the text doesn't have or without memory; the step behind it then answers.
+// A binding fails only for a place that the text doesn't have or without memory; the step after it then answers.
 Statement& Statement::bind(int place, std::int64_t value) noexcept {
   sqlite3_bind_int64(statement_, place, value);
   return *this;

@@ -37,7 +37,7 @@ class StoreCheck {
   StoreCheck(const StoreCheck&) = delete;
   StoreCheck& operator=(const StoreCheck&) = delete;
 
-  // Begins anew. An error is one of reading; the check is then to be begun anew.
+  // Starts again. An error is one of reading; the check is then to be started again.
   [[nodiscard]] Status begin();
   // Passes over what is too damaged to be read, and counts it as lost.
   void tolerateDamage() noexcept { tolerant_ = true; }

@@ -19,7 +19,7 @@ const FlumeChannel* find(const FlumeSamples& samples, const FlumeChannelName& na
   return found == samples.end() ? nullptr : &*found;
 }
 
-// A count that fell began anew in between.
+// A count that fell started again in between.
 template <class Count>
 Count grown(Count later, Count earlier) {
   return later < earlier ? later : later - earlier;

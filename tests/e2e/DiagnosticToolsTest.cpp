@@ -98,7 +98,7 @@ TEST_F(DiagnosticTools, AFaultyCallPromptsOnceInTheBackOffOverARestart) {
   ASSERT_TRUE(startOn(true));
   playInSession("telephony", faultyCall_);
   EXPECT_EQ(received("tattle").size(), 1U);
-  // Whoever forgets the last run is asked anew.
+  // Whoever forgets the last run is asked again.
   ASSERT_EQ(ctl({"defaults", "delete", kSuite, "ParleyInvalidXyTatlastRun"}).status, 0);
   playInSession("telephony", faultyCall_);
   EXPECT_EQ(received("tattle").size(), 2U);

@@ -44,7 +44,7 @@ class DriverChannels : public ServiceFixture {
     ASSERT_TRUE(client_->call(client::createReportingSession(reporterID)).ok());
     ASSERT_TRUE(client_->call(client::setServiceType(kWisp, reporterID)).ok());
     ASSERT_EQ(client_->send(client::startReportingSessionForID(reporterID)), client::SendStatus::Sent);
-    ASSERT_TRUE(client_->call(client::reporterID(reporterID)).ok());  // behind it the session runs
+    ASSERT_TRUE(client_->call(client::reporterID(reporterID)).ok());  // after it the session runs
   }
   void stopSession(std::int64_t reporterID) {
     ASSERT_TRUE(client_->call(client::stopReportingSessionForID(reporterID)).ok());

@@ -46,7 +46,7 @@ void writeFile(const std::string& path, const std::string& content) {
 
 namespace {
 
-// Writes the number's digits and an end behind them; there is room for all that a process ID can have.
+// Writes the number's digits and an end after them; there is room for all that a process ID can have.
 void writeNumber(pid_t number, char* at) {
   pid_t unit = 1;
   while (number / unit >= 10) {

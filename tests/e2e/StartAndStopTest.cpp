@@ -1,4 +1,4 @@
-// How the service starts, whom it refuses, and what it leaves behind when it ends.
+// How the service starts, whom it refuses, and what it leaves when it ends.
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/un.h>

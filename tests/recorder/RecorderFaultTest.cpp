@@ -191,7 +191,7 @@ TEST_F(RecorderFault, AnotherWriterIsWaitedFor) {
   ASSERT_TRUE(flush());
   sqlite3* other = nullptr;
   ASSERT_EQ(sqlite3_open(file().c_str(), &other), SQLITE_OK);
-  sqlite3_busy_timeout(other, 5000);  // the recorder may still be tidying up behind its commit
+  sqlite3_busy_timeout(other, 5000);  // the recorder may still be tidying up after its commit
   ASSERT_EQ(sqlite3_exec(other, "BEGIN IMMEDIATE", nullptr, nullptr, nullptr), SQLITE_OK);
   record("second");
   ASSERT_TRUE(eventually([&] { return errors() == 1; }));

@@ -168,7 +168,7 @@ TEST_F(RecorderFileTest, DamageFoundWhileRunningMovesOnToAFreshFile) {
     recordMany(1000, 1000);
     ASSERT_TRUE(flush());
   }
-  // Behind the first pages, which are always at hand, and far from the newest ones; retention comes by here first.
+  // After the first pages, which are always at hand, and far from the newest ones; retention comes by here first.
   overwrite(file(), 10 * 8192, 2 << 20);
   for (int round = 0; round < 10; ++round) {
     recordMany(1000, 1000);

@@ -37,7 +37,7 @@ struct Playing {
 // How `found` differs from what is expected, with the path of the member; empty when it doesn't.
 std::string differenceOf(const std::string& path, const json& expected, const json& found, const Playing& playing);
 // `found` as an expectation: what is known to differ from run to run in the notation above. But for session numbers,
-// which the writer numbers anew.
+// which the writer numbers again.
 json asExpectation(const json& found, const Playing& playing);
 // Throws std::runtime_error for a text of the form "<...>" that means nothing.
 void checkNotation(const json& expected);

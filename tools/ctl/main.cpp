@@ -69,7 +69,7 @@ void describe(CLI::App& app, Context& context, Options& options) {
   addCheckCommand(app, context);
 }
 
-// The words of the command line, last one first. A value of --wait stands behind a sign alone: what follows it is the
+// The words of the command line, last one first. A value of --wait stands after a sign alone: what follows it is the
 // command's.
 std::vector<std::string> wordsOf(int argc, const char* const* argv) {
   std::vector<std::string> words(argv + 1, argv + argc);

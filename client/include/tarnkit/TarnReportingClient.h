@@ -15,7 +15,7 @@
 // Every request that was sent has its handler called exactly once: with the reply, with ConnectionLost when the
 // connection ends (then the lost handler is called once, after them), or with Cancelled at close(). A start's reply is
 // held by the service until the session stops; when it can never come (the session was destroyed, replaced or retyped,
-// or was running already) the handler gets Cancelled. SIGPIPE is never raised. Connecting anew is the owner's choice.
+// or was running already) the handler gets Cancelled. SIGPIPE is never raised. Connecting again is the owner's choice.
 #pragma once
 
 #include <chrono>

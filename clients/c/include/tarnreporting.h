@@ -9,7 +9,7 @@
  * and are dropped and counted once that is full. Every other call may wait for a lock, or up to the time it is given.
  *
  * The client's helper thread connects (to the path asked for, else TARNREPORTING_SOCKET, else the user's socket, else
- * the system's), connects again when the service went away, and makes the sessions anew then.
+ * the system's), connects again when the service went away, and then makes the sessions once more.
  *
  * Threads: a writer belongs to one thread at a time; everything else may be used by any. After fork() the child's
  * handles are dead: every call on them answers TARNREPORTING_FORKED. Nothing here ends the process, installs a signal

@@ -43,7 +43,7 @@ class Bytes {
     std::memmove(data_, data_ + count, size_ - count);
     size_ -= count;
   }
-  // Room for so many more bytes behind the others; null when there is no memory. They count once grow() says so.
+  // Room for so many more bytes after the others; null when there is no memory. They count once grow() says so.
   std::uint8_t* room(std::size_t count) noexcept { return reserve(count) ? data_ + size_ : nullptr; }
   void grow(std::size_t count) noexcept { size_ += count; }
   void overwrite(std::size_t at, const void* bytes, std::size_t count) noexcept {

@@ -1,5 +1,5 @@
 // Link: the connection to the service: requests out, the fronts of replies in. Never waits. When anything goes wrong it
-// closes itself, and whoever owns it starts anew.
+// closes itself, and whoever owns it starts again.
 //
 // Owned by the client, used under its lock. Threads: one at a time.
 #pragma once
@@ -25,7 +25,7 @@ enum class Operation : std::uint8_t {
 
 class Link {
  public:
-  // Of a socket path, with the zero behind it.
+  // Of a socket path, with the zero after it.
   static constexpr std::size_t kMostPath = 108;
 
   Link() = default;

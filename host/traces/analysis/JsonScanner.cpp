@@ -39,7 +39,7 @@ std::size_t sequenceBytes(std::string_view text) noexcept {
   const unsigned first = byte(0);
   const std::size_t bytes = first >= 0xF0 ? 4 : first >= 0xE0 ? 3 : 2;
   if (first < 0xC2 || first > 0xF4 || text.size() < bytes) return 0;
-  // No longer than need be, no surrogate, none behind the last character.
+  // No longer than need be, no surrogate, none after the last character.
   const unsigned least = first == 0xE0 ? 0xA0 : first == 0xF0 ? 0x90 : 0x80;
   const unsigned most = first == 0xED ? 0x9F : first == 0xF4 ? 0x8F : 0xBF;
   if (byte(1) < least || byte(1) > most) return 0;

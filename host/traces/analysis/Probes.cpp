@@ -117,7 +117,7 @@ Result<std::vector<Probe>> probesFor(std::string_view descriptions, const Chrome
 bool matchesPattern(std::string_view pattern, std::string_view text) noexcept {
   std::size_t at = 0;
   std::size_t star = std::string_view::npos;  // the last "*" that was met
-  std::size_t resume = 0;                     // where the text behind its run begins
+  std::size_t resume = 0;                     // where the text after its run begins
   std::size_t i = 0;
   while (i < text.size()) {
     if (at < pattern.size() && pattern[at] == '*') {

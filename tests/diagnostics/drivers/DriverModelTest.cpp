@@ -179,7 +179,7 @@ class Drawing {
     }
     return drawn;
   }
-  // Time passes: channels count on, begin anew, change, vanish and appear.
+  // Time passes: channels count on, start again, change, vanish and appear.
   FlumeSamples later(FlumeSamples channels) {
     for (FlumeChannel& channel : channels) {
       channel.value += below(7) - 2;

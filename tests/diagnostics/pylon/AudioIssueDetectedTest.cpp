@@ -103,7 +103,7 @@ TEST(AudioIssueDetected, CopiesAreEqualAndIndependent) {
 
 TEST(AudioIssueDetected, CopyOfARecordWithoutATimestampHasNoneEvenOverOneThatHad) {
   AudioIssueDetected source = fullRecord();
-  const AudioIssueDetected taken(std::move(source));  // leaves a value behind the cleared timestamp
+  const AudioIssueDetected taken(std::move(source));  // leaves a value after the cleared timestamp
   const AudioIssueDetected copy(source);              // NOLINT(bugprone-use-after-move): what is left is the point
   EXPECT_TRUE(taken.hasTimestamp());
   EXPECT_FALSE(copy.hasTimestamp());
@@ -178,7 +178,7 @@ TEST(AudioIssueDetected, EveryFieldCountsForEqualityAndHash) {
 
 TEST(AudioIssueDetected, TimestampsThatAreNotSetAreNotCompared) {
   AudioIssueDetected left = fullRecord();
-  const AudioIssueDetected taken(std::move(left));  // `left` keeps a value behind its cleared timestamp
+  const AudioIssueDetected taken(std::move(left));  // `left` keeps a value after its cleared timestamp
   AudioIssueDetected plain;
   plain.setDuration(-7);
   EXPECT_TRUE(left == plain);  // NOLINT(bugprone-use-after-move): what is left is the point

@@ -264,7 +264,7 @@ class RuledInstance : public TarnReportingSnareWorkerInstance {
   }
 };
 
-// The whole history since the last fire, looked through anew for each message.
+// The whole history since the last fire, looked through again for each message.
 class RuleModel {
  public:
   explicit RuleModel(Rule rule) : rule_(rule) {}

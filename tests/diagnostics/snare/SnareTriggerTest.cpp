@@ -263,7 +263,7 @@ TEST_F(SnareTrigger, WithoutACountTheFirstMessageBehindTheTimeFires) {
   platform_.advance(1ms);
   handle(4);
   EXPECT_EQ(trail(), (std::vector<std::string>{"FiringProbe fire 4"}));
-  handle(5);  // the time begins anew
+  handle(5);  // the time starts again
   EXPECT_EQ(trail().size(), 1U);
   EXPECT_EQ(state().interestedCount, 1U);
 }

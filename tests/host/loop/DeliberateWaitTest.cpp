@@ -178,7 +178,7 @@ TEST_F(DeliberateWait, DoesNotBeginInsideItself) {
     running_.loop.waitUntil(begin + 60s, [&] {
       EXPECT_TRUE(running_.loop.waits());
       running_.loop.waitUntil(begin + 60s, [] { return false; });
-      running_.loop.queue()->wake();  // so that it is asked anew
+      running_.loop.queue()->wake();  // so that it is asked again
       return ++asked == 2;
     });
     EXPECT_EQ(asked, 2);

@@ -72,7 +72,7 @@ TEST_F(LinuxConditionsTest, AWaitOnTheServerQueueIsToldAsDeliberate) {
   flag = true;
   condition->signal();
   condition->unlock();
-  running_.onQueue([] {});  // behind the work that waited
+  running_.onQueue([] {});  // after the work that waited
   EXPECT_FALSE(running_.loop.progress().sample().waitingSince.has_value());
 }
 

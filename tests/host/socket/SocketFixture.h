@@ -1,4 +1,4 @@
-// SocketFixture: listener, connections and loop over a real socket, with a recording service behind them.
+// SocketFixture: listener, connections and loop over a real socket, with a recording service after them.
 #pragma once
 
 #include <gtest/gtest.h>

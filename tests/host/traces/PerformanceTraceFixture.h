@@ -41,7 +41,7 @@ class TraceDelegate final : public platform::PerformanceTraceDelegate {
     note("complete " + token, error);
   }
 
-  // Called on the facility's thread behind the note; set before the start.
+  // Called on the facility's thread after the note; set before the start.
   std::function<void(const std::string&)> also;
 
   bool waitFor(const std::string& call) const {

@@ -67,13 +67,13 @@ TEST_F(PerformanceTraceStress, TracesComeAndGoWhileThreadsSpeak) {
       trace.session->startTrace();
       switch (random() % 4) {
         case 0:
-          break;  // let go of right behind the start
+          break;  // let go of right after the start
         case 1:
           EXPECT_TRUE(trace.delegate->waitFor("start"));
           break;
         case 2:
           trace.session->stopTrace();
-          break;  // let go of right behind the stop
+          break;  // let go of right after the stop
         default: {
           EXPECT_TRUE(trace.delegate->waitFor("start"));
           const std::string text = finish(trace);

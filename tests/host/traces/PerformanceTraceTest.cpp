@@ -126,7 +126,7 @@ TEST_F(PerformanceTrace, FurtherStartsAndStopsDoNothing) {
   finish(trace);
   trace.session->stopTrace();
   trace.session->startTrace();
-  const Trace other = startTrace();  // behind whatever those might have posted
+  const Trace other = startTrace();  // after whatever those might have posted
   EXPECT_EQ(trace.delegate->calls(), (Strings{"start", "stop", "complete trace-1"}));
 }
 

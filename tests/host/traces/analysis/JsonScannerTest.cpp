@@ -103,7 +103,7 @@ TEST(JsonScanner, TellsWholeNumbersWithTheirKind) {
     std::vector<std::string> wholes;
   };
   Numbers numbers;
-  // The listener ends it behind the sixth.
+  // The listener ends it after the sixth.
   EXPECT_EQ(scanJson("[-7, 9223372036854775807, 18446744073709551616, -18446744073709551616, 1.0, 1e3, x", numbers),
             80U);
   EXPECT_EQ(numbers.wholes, (std::vector<std::string>{"-7", "9223372036854775807", "9223372036854775807",
