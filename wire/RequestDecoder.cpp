@@ -85,7 +85,7 @@ bool RequestPass::countOpenItems() {
 bool RequestPass::readID() {
   trouble_ = "no readable id";
   CborHead head;
-  if (items_ < 1 || !in_.readHead(head) || head.major != Major::Unsigned) return false;
+  if (!in_.readHead(head) || head.major != Major::Unsigned) return false;
   request_.id = head.argument;
   hasID_ = true;
   return true;
@@ -151,10 +151,7 @@ bool RequestPass::read(plist::Dictionary& dictionary, const char* expected) {
     return fail(ErrorCode::NotPropertyList, reader.trouble());
   }
   std::optional<plist::Dictionary> finished = builder_.finishDictionary(keyLists_);
-  if (!finished) {
-    builder_.reset();
-    return fail(ErrorCode::NotPropertyList, "a key given twice");
-  }
+  if (!finished) return fail(ErrorCode::NotPropertyList, "a key given twice");
   dictionary = std::move(*finished);
   return true;
 }
@@ -163,7 +160,7 @@ bool RequestPass::read(ReporterIDs& reporterIDs, const char* expected) {
   CborHead head;
   if (!in_.readHead(head)) return false;
   if (head.major == Major::Simple && head.info == 22) return true;
-  if (head.major != Major::Array || (!head.open() && head.argument > in_.left())) return badArgument(expected);
+  if (head.major != Major::Array || head.argument > in_.left()) return badArgument(expected);
   constexpr const char* kTooMany = "reporter IDs: at most 65536 expected";
   static_assert(kMaxReporterIDs == 65536);
   if (head.argument > kMaxReporterIDs) return badArgument(kTooMany);

@@ -36,7 +36,7 @@ inline bool isAscii(std::string_view text) noexcept {
     std::uint32_t last;
     std::memcpy(&first, at, sizeof first);
     std::memcpy(&last, at + left - sizeof last, sizeof last);
-    bits = (static_cast<std::uint64_t>(first) << 32U) | last;
+    bits = first | last;
   } else {
     for (; left > 0; ++at, --left) {
       bits |= static_cast<unsigned char>(*at);

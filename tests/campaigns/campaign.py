@@ -1,11 +1,12 @@
 #!/usr/bin/env python3
 """Fault, attack and load campaigns against the real service. Each prints one line with its figures and its seed.
 
-usage: campaign.py --programs DIR --shims DIR [--list] [--seed N] [--brief] [--keep] [NAME|all [SECONDS]]
+usage: campaign.py --programs DIR --shims DIR [--list] [--seed N [--fresh]] [--brief] [--keep] [NAME|all [SECONDS]]
 
 SECONDS is how long one campaign goes on (20); some end when nothing is left to try. The seed is that of TARN_TEST_SEED,
-else of --seed, else a fresh one. Exit 1 when one found something, with what it was and how to repeat it on stderr.
---brief is for runs among other tests. --keep leaves the campaign's folder where it is and says where.
+else of --seed, else a fresh one. With --fresh a campaign goes on for half as long with a fresh seed. Exit 1 when one
+found something, with what it was and how to repeat it on stderr. --brief is for runs among other tests. --keep leaves
+the campaign's folder where it is and says where.
 """
 
 import argparse
@@ -35,14 +36,22 @@ CAMPAIGNS = {
 }
 
 
-def seed_of(asked):
+def runs_of(asked, fresh, seconds):
+    """Seeds, and how long each is played: a seed that is to be repeated is played alone."""
     text = os.environ.get(SEED_VARIABLE, asked)
     if text is None:
-        return int.from_bytes(os.urandom(4), "big")
+        return [(fresh_seed(), seconds)]
     try:
-        return int(text)
+        runs = [(int(text), seconds)]
     except ValueError:
         raise SystemExit(f"campaign: {text!r} is no seed") from None
+    if fresh and SEED_VARIABLE not in os.environ:
+        runs.append((fresh_seed(), seconds / 2))
+    return runs
+
+
+def fresh_seed():
+    return int.from_bytes(os.urandom(4), "big")
 
 
 def figures_line(name, context, figures):
@@ -59,11 +68,11 @@ def tell(name, context, seconds):
     print(f"  replay: {SEED_VARIABLE}={context.seed} ./dev campaign {name} {seconds:g}", file=sys.stderr, flush=True)
 
 
-def run(name, options, seconds):
+def run(name, options, seed, seconds):
     """Whether it held."""
     folder = tempfile.mkdtemp(prefix="tarncampaign")
     context = Context(os.path.join(options.programs, "tarnreportingd"), options.shims, folder, seconds,
-                      seed_of(options.seed), options.brief)
+                      seed, options.brief)
     figures = {}
     try:
         importlib.import_module(CAMPAIGNS[name][0]).run(context, figures)
@@ -86,6 +95,7 @@ def options_of(words):
     parser.add_argument("--programs", default="build/bin")
     parser.add_argument("--shims", default="build/tests/shims")
     parser.add_argument("--seed")
+    parser.add_argument("--fresh", action="store_true")
     parser.add_argument("--list", action="store_true")
     parser.add_argument("--brief", action="store_true")
     parser.add_argument("--keep", action="store_true")
@@ -112,7 +122,8 @@ def main(words):
         return 64
     raise_descriptor_limit()
     names = CAMPAIGNS if options.name == "all" else [options.name]
-    held = [run(name, options, options.seconds) for name in names]
+    held = [run(name, options, *each) for name in names
+            for each in runs_of(options.seed, options.fresh, options.seconds)]
     return 0 if all(held) else 1
 
 

@@ -1,11 +1,13 @@
 """That a campaign would notice: the account of numbered messages, and the image of a power cut."""
 
+import os
 import random
 import unittest
+from unittest import mock
 
 import powercut
 from account import FIRST, judge, message_parts
-from campaign import figures_line
+from campaign import SEED_VARIABLE, figures_line, runs_of
 from context import Context
 from wire import PLAYBACK, PLAYBACK_START, SEND, request
 
@@ -86,6 +88,35 @@ class Line(unittest.TestCase):
                          "campaign kills seed=4711 kills=3 worst_ms=1.2: held")
         context.fail("something")
         self.assertEqual(figures_line("kills", context, {}), "campaign kills seed=4711 : failed(1)")
+
+
+class Seeds(unittest.TestCase):
+    def setUp(self):
+        patched = mock.patch.dict(os.environ)
+        patched.start()
+        self.addCleanup(patched.stop)
+        os.environ.pop(SEED_VARIABLE, None)
+
+    def test_fixed_one_is_played_whole_and_a_fresh_one_half_as_long(self):
+        first, second = (runs_of("1", True, 8) for _ in range(2))
+        self.assertEqual((first[0], second[0]), ((1, 8), (1, 8)))
+        self.assertEqual((first[1][1], second[1][1]), (4, 4))
+        self.assertNotEqual(first[1][0], second[1][0])
+
+    def test_one_that_is_asked_for_is_played_alone(self):
+        self.assertEqual(runs_of("1", False, 8), [(1, 8)])
+        os.environ[SEED_VARIABLE] = "4711"
+        self.assertEqual(runs_of("1", True, 8), [(4711, 8)])
+
+    def test_without_any_a_fresh_one_is_played_whole(self):
+        first, second = (runs_of(None, False, 8) for _ in range(2))
+        self.assertEqual((len(first), first[0][1]), (1, 8))
+        self.assertNotEqual(first, second)
+
+    def test_text_that_is_no_number_ends_it(self):
+        os.environ[SEED_VARIABLE] = "x"
+        with self.assertRaises(SystemExit):
+            runs_of("1", True, 8)
 
 
 if __name__ == "__main__":

@@ -165,7 +165,11 @@ TEST(RequestDecoder, WrongCountsOfArgumentsAreBadArguments) {
                           "00"}) {
     EXPECT_EQ(decodeHex(hex).code(), 2) << hex;
   }
-  EXPECT_EQ(decodeHex("820701").refusal.text, "createReportingSession: wrong number of arguments");
+  for (const char* hex : {"820701", "9f0701ff", "9f07010203ff", "9f0701020304050607ff"}) {
+    EXPECT_EQ(decodeHex(hex).refusal.text, "createReportingSession: wrong number of arguments") << hex;
+  }
+  // One more than the operation with the most arguments takes.
+  EXPECT_EQ(decodeHex("9f0706a000008000ff").refusal.text, "sendMessage: wrong number of arguments");
 }
 
 TEST(RequestDecoder, WrongKindsInAnArgumentsPlaceAreBadArguments) {
@@ -293,8 +297,13 @@ TEST(RequestDecoder, WhatIsNotWellFormedIsUnreadableHoweverDeepAndWhateverElseIs
 }
 
 TEST(RequestDecoder, AListThatClaimsMoreThanTheFrameHoldsMakesNoRoom) {
-  EXPECT_TRUE(decodeHex("860706a1616b0501029bffffffffffffffff").unreadable());
-  EXPECT_TRUE(decodeHex("860706a1616b0501029affffffff").unreadable());
+  for (const char* hex :
+       {"860706a1616b0501029bffffffffffffffff", "860706a1616b0501029affffffff", "860706a1616b05010299ffff07"}) {
+    const testing::HeapGrowth heap;
+    const Decoded decoded = decodeHex(hex);
+    EXPECT_TRUE(decoded.unreadable()) << hex;
+    EXPECT_LT(heap.bytes(), 4096) << hex;
+  }
 }
 
 TEST(RequestDecoder, ABreakAfterATaggedItemEndsItsArray) {

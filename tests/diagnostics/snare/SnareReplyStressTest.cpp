@@ -46,10 +46,10 @@ TEST_F(SnareReplyStress, RepliesMeetStopsRestartsAndTheEndOfSessions) {
   constexpr int kSessions = recorder::RecorderSnareService::kMostWaitingReplies / 6;
   int sessions = 0;
   for (const std::uint64_t seed : testSeeds(1)) {
+    SCOPED_TRACE(seedNote(seed));
     std::mt19937 random(seed);
-    const int first = sessions;
     sessions += kSessions;
-    for (int i = first; i < sessions; ++i) {
+    for (int i = 0; i < kSessions; ++i) {
       Session session = startedSession(AudioServiceType::Alarms, i + 2);
       sendLowRms(session, 3);
       session->sendMessage(hapticLeak(2 * i));

@@ -32,6 +32,16 @@ class TraceFixture : public SessionFixture {
     putTemporaryFile();
   }
 
+  FakePerformanceTraceService& facility() { return platform_.performanceTrace; }
+  // The facility answers while somebody waits.
+  void answerInWaits() {
+    facility().callbacks().set(ReplyFault::Hold);
+    platform_.conditions.onWait([this](auto) {
+      facility().callbacks().deliverHeld();
+      return WaitEnd::TimesOut;  // unless that signalled
+    });
+  }
+
   // What the writer would have written; each move takes it away.
   void putTemporaryFile() { platform_.fileSystem.putFile(kTemporaryFile, "values"); }
 

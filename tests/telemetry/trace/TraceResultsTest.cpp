@@ -334,7 +334,8 @@ TEST_F(TraceResults, DescriptionsThatCannotBeReadAreLogged) {
 
 TEST_F(TraceResults, LibraryIsToldThatItsResultsAreKnownToBeNoPromise) {
   play();
-  EXPECT_FALSE(platform_.processEnvironment.value("APPROVED_BY_SKEIN_TEAM").value_or("").empty());
+  EXPECT_EQ(platform_.processEnvironment.value("APPROVED_BY_SKEIN_TEAM"),
+            "tarnkit measures its own test sessions with it");
 }
 
 TEST_F(TraceResults, LibraryIsToldSoBeforeItIsLoaded) {
