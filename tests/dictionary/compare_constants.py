@@ -1,5 +1,5 @@
-"""Compiles the constants for C and C++ as strictly as a client may, and compares them and those for Python with the
-numbers and keys of dictionary/messages.toml, read here without the generator.
+"""Compiles the constants and reports for C and C++ as strictly as a client may, and compares the constants and those
+for Python with the numbers and keys of dictionary/messages.toml, read here without the generator.
 
 usage: compare_constants.py ROOT C++_COMPILER
 """
@@ -13,7 +13,8 @@ import tempfile
 import tomllib
 
 LISTS = (("category", "Category"), ("domain", "Domain"), ("type", "Type"), ("service", "ServiceType"))
-FLAGS = ["-Wall", "-Wextra", "-Wpedantic", "-Wconversion", "-Werror"]
+# {0} of a struct is how C says it.
+FLAGS = ["-Wall", "-Wextra", "-Wpedantic", "-Wconversion", "-Werror", "-Wno-missing-field-initializers"]
 DEFINED = re.compile(r"^#define (TARN_\w+) (?:UINT\d+_C\((\w+)\)|\"([^\"]+)\")", re.MULTILINE)
 ENUMERATION = re.compile(r"enum class (\w+) : std::uint\d+_t \{(.*?)\};", re.DOTALL)
 ENUMERATOR = re.compile(r"^  (\w+) = (\w+),$", re.MULTILINE)
@@ -73,20 +74,23 @@ def check_python(text, numbers, keys):
 
 
 def compile_headers(root, compiler):
-    c_folder, cpp_folder = (os.path.join(root, "clients", *rest) for rest in (("c", "include"), ("cpp",)))
+    c_folder, cpp_folder = (os.path.join(root, "clients", *rest) for rest in (("c", "include"), ("cpp", "include")))
     c = '#include <tarnreporting_messages.h>\nconst char* key = TARN_KEY_SESSION_OUTPUT_RUNNING;\n' \
         'unsigned category = TARN_DOMAIN_DSP | TARN_CATEGORY_PLAYBACK;\n'
     cpp = '#include <tarnreporting_messages.hpp>\nusing namespace tarnreporting;\n' \
           'static_assert((Domain::DSP | Category::Playback) == Category{0x10000004});\n' \
           'static_assert(keys::kSessionOutputRunning == "session_output_running");\n'
+    c_reports = '#include <tarnreporting_reports.h>\n'
+    cpp_reports = '#include <tarnreporting_reports.hpp>\n'
     with tempfile.TemporaryDirectory(prefix="tarnwords") as folder:
-        for language, standard, text, include in (("c", "c11", c, c_folder), ("c++", "c++17", c, c_folder),
-                                                  ("c++", "c++17", cpp, cpp_folder), ("c++", "c++20", cpp, cpp_folder)):
+        for language, standard, text in (("c", "c11", c), ("c++", "c++17", c), ("c++", "c++17", cpp),
+                                         ("c++", "c++20", cpp), ("c", "c11", c_reports), ("c++", "c++17", c_reports),
+                                         ("c++", "c++17", cpp_reports), ("c++", "c++20", cpp_reports)):
             path = os.path.join(folder, "client")
             with open(path, "w", encoding="utf-8") as file:
                 file.write(text)
-            subprocess.run([compiler, "-x", language, f"-std={standard}", *FLAGS, "-fsyntax-only", "-I", include, path],
-                           check=True)
+            subprocess.run([compiler, "-x", language, f"-std={standard}", *FLAGS, "-fsyntax-only", "-I", c_folder,
+                            "-I", cpp_folder, path], check=True)
 
 
 def main(root, compiler):
@@ -94,7 +98,7 @@ def main(root, compiler):
         numbers, keys = wanted_of(tomllib.load(file))
     clients = os.path.join(root, "clients")
     check_c(read(clients, "c", "include", "tarnreporting_messages.h"), numbers, keys)
-    check_cpp(read(clients, "cpp", "tarnreporting_messages.hpp"), numbers, keys)
+    check_cpp(read(clients, "cpp", "include", "tarnreporting_messages.hpp"), numbers, keys)
     check_python(read(clients, "python", "tarnreporting", "messages.py"), numbers, keys)
     compile_headers(root, compiler)
     print(f"{len(keys)} keys in three languages")

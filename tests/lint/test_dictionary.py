@@ -57,6 +57,13 @@ script = '''
 recorded = '''
 {"backend": "tally", "name": "x", "payload": {"play_seconds": 1}}
 '''
+
+[[report]]
+name = "volume changed"
+category = "Generic"
+type = "Generic"
+text = "It is so loud."
+fields = [{key = "volume", argument = "volume"}]
 """
 VOCABULARY = """
 enum class AudioEventCategory : std::uint32_t {
@@ -195,6 +202,31 @@ class Table(unittest.TestCase):
         self.expect_fault('{"play_seconds": 1}', '{"play_second": 1}', "which isn't among its keys")
         self.expect_fault('{"op": "getAllReporters"}', '{"op": getAllReporters}', "no JSON")
         self.expect_fault('category = "Generic"\n', 'category = "Nothing"\n', "there is no category Nothing")
+
+    def test_what_is_wrong_with_a_report_is_told(self):
+        self.expect_fault('name = "volume changed"', 'name = "volumeChanged"', "its name isn't words")
+        self.expect_fault('"It is so loud."', '"It is so loud"', "report volume changed: its text is no sentence")
+        self.expect_fault('category = "Generic"\ntype = "Generic"\ntext', 'category = "No"\ntype = "Generic"\ntext',
+                          "report volume changed: there is no category No")
+        self.expect_fault('type = "Generic"\ntext = "It', 'type = "No"\ntext = "It', "there is no type No")
+        field = 'fields = [{key = "volume", argument = "volume"}]'
+        for after, part in (('{key = "no", argument = "volume"}', "there is no key no"),
+                            ('{key = "volume"}', "has either a value or an argument"),
+                            ('{key = "volume", is = 0.5, argument = "volume"}', "has either a value or an argument"),
+                            ('{key = "volume", is = "loud"}', "isn't 'loud'"),
+                            ('{key = "volume", argument = "the volume"}', "whose name is no word"),
+                            ('{key = "volume", argument = "volume", hertz = true}', "is no text of Hz"),
+                            ('{key = "volume", is = 0.5}, {key = "volume", is = 0.5}', "key volume stands twice"),
+                            ('{key = "volume", loud = true}', "report volume changed")):
+            self.expect_fault(field, f"fields = [{after}]", part)
+
+    def test_a_report_becomes_a_function_in_each_language(self):
+        files = made(TABLE)
+        self.assertIn("tarnreporting_report_volume_changed(", files["clients/c/include/tarnreporting_reports.h"])
+        self.assertIn("Result volumeChanged(Writer& writer, double volume)",
+                      files["clients/cpp/include/tarnreporting_reports.hpp"])
+        self.assertIn("def volume_changed(self, volume: float) -> bool:",
+                      files["clients/python/tarnreporting/reports.py"])
 
     def test_names_are_cut_into_words(self):
         self.assertEqual([upper("mFormatID"), upper("vp_config_primary_vocoderFs"), upper("MIDIDriver"),

@@ -17,10 +17,13 @@ FILES = (
     "etc/tarnreporting/tarnreportingd.toml",
     "lib/tarnkit/traceanalysis.so", "share/doc/tarnkit/LICENSE", "share/doc/tarnkit/README.md",
     "share/doc/tarnkit/operations.md", "share/doc/tarnkit/wire.md",
+    "lib/python3/dist-packages/tarnreporting/__init__.py", "lib/python3/dist-packages/tarnreporting/messages.py",
 )
 # All of them: what isn't here is nobody else's.
 HEADERS = {"include/tarnkit/" + name for name in ("Options.h", "Reply.h", "Requests.h", "TarnReportingClient.h",
-                                                  "Value.h")} | {"include/tarnreporting.h", "include/tarnreporting.hpp"}
+                                                  "Value.h")} | {
+    "include/tarnreporting" + ending for ending in (".h", ".hpp", "_messages.h", "_messages.hpp", "_reports.h",
+                                                    "_reports.hpp")}
 LIBRARIES = ("libtarn_client.a", "libtarn_wire.a", "libtarn_plist.a", "cmake/tarnkit/tarnkit-config.cmake",
              "cmake/tarnkit/tarnkit-config-version.cmake", "libtarnreporting.so.1",
              "cmake/tarnreporting/tarnreporting-config.cmake", "pkgconfig/tarnreporting.pc")

@@ -32,6 +32,12 @@ KEYS = """## Keys
 What a reader gets of another kind is converted: a text counts by its leading number, a boolean is 1 or 0. Nothing is
 refused for it, so a wrong kind is found by `tarnreportingctl lint` or not at all. Blanks in keys become `_`. A `*` in a
 name stands for any text. Parts are called without `TarnReporting` here."""
+REPORTS = """## Reports
+
+Messages for which the clients have a function each, so that an engine needs no key: C
+`tarnreporting_report_output_running(writer, &reports, 0.5, "Speaker")` (`tarnreporting_reports.h`), C++
+`reports.outputRunning(writer, 0.5, "Speaker")` (`tarnreporting_reports.hpp`), Python
+`session.output_running(0.5, "Speaker")`."""
 DERIVED = """## Messages that the service makes
 
 To these the intake adds what it adds to every message: a stamp (and `invalid_timestamp`, since they come without),
@@ -49,6 +55,8 @@ def document(table):
         sections.setdefault(key.section, []).append(key)
     for section, keys in sections.items():
         blocks.append(f"### {section}\n\n" + key_table(keys))
+    blocks.append(REPORTS + "\n\n" + rows("report", "arguments", [report_row(report) for report in table.reports],
+                                          "category, type", "keys", "meaning"))
     blocks.append(DERIVED)
     blocks.extend(derived(entry) for entry in table.derived if not entry.event)
     blocks.append(EVENTS)
@@ -73,6 +81,13 @@ def names(table):
 
 def number(value):
     return str(value) if value < 0x10000 else f"{value} (0x{value:08X})"
+
+
+def report_row(report):
+    keys = [f"`{each.key}`" + (f" ({each.argument})" if each.argument else f" = {json.dumps(each.constant)}")
+            for each in report.fields]
+    return (report.name, ", ".join(each.argument for each in report.arguments()) or "none",
+            f"{report.category} {report.type}", ", ".join(keys), report.text)
 
 
 def key_table(keys):

@@ -1,5 +1,6 @@
 #!/usr/bin/env python3
-"""Makes from dictionary/messages.toml what is made from it: the data dictionary, the clients' constants, and the table
+"""Makes from dictionary/messages.toml what is made from it: the data dictionary, the clients' constants and
+reports, and the table
 that tarnreportingctl looks at.
 
 usage: generate.py [--check]    --check writes nothing: it names the files that aren't current; exit 1 when there is one
@@ -10,14 +11,18 @@ import sys
 
 from document import document
 from languages import c_header, cpp_header, python_module
+from reports import c_reports, cpp_reports, python_reports
 from source import source
 from table import PATH, Fault, load
 
 MADE = {
     "docs/messages.md": document,
     "clients/c/include/tarnreporting_messages.h": c_header,
-    "clients/cpp/tarnreporting_messages.hpp": cpp_header,
+    "clients/c/include/tarnreporting_reports.h": c_reports,
+    "clients/cpp/include/tarnreporting_messages.hpp": cpp_header,
+    "clients/cpp/include/tarnreporting_reports.hpp": cpp_reports,
     "clients/python/tarnreporting/messages.py": python_module,
+    "clients/python/tarnreporting/reports.py": python_reports,
     "dictionary/MessageTable.cpp": source,
 }
 

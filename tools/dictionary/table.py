@@ -104,6 +104,27 @@ class Derived:
 
 
 @dataclass(frozen=True)
+class Field:
+    """A key of a report, and where its value comes from: a constant or an argument."""
+    key: str
+    constant: object = None
+    argument: str = ""
+    hertz: bool = False
+
+
+@dataclass(frozen=True)
+class Report:
+    name: str
+    category: str
+    type: str
+    text: str
+    fields: list
+
+    def arguments(self):
+        return [each for each in self.fields if each.argument]
+
+
+@dataclass(frozen=True)
 class Table:
     categories: list
     domains: list
@@ -112,6 +133,10 @@ class Table:
     parts: list
     keys: list
     derived: list
+    reports: list
+
+    def kind_of(self, name):
+        return next(key.kind for key in self.keys if key.name == name)
 
 
 def load(text):
@@ -121,7 +146,7 @@ def load(text):
     except tomllib.TOMLDecodeError as error:
         raise Fault(f"the table is no TOML: {error}") from error
     kinds = {"category": Named, "domain": Named, "type": Named, "service": Named, "part": Part, "key": Key,
-             "derived": Derived}
+             "derived": Derived, "report": Report}
     if unknown := set(raw) - set(kinds):
         raise Fault(f"{sorted(unknown)[0]}: there is no such list")
     lists = {name: [made(kind, name, row) for row in raw.get(name, [])] for name, kind in kinds.items()}
@@ -133,6 +158,9 @@ def load(text):
 
 def made(kind, what, row):
     try:
+        if kind is Report:
+            row = {**row, "fields": [Field(**{"constant" if name == "is" else name: value
+                                              for name, value in each.items()}) for each in row.get("fields", [])]}
         return kind(**row)
     except TypeError as error:
         name = row.get("name") or row.get("event") or row.get("category", "?")
@@ -147,6 +175,9 @@ def faults(table):
     for entry in table.derived:
         yield from (f"derived {entry.title()}: {what}" for what in faults_of_derived(table, entry, parts))
     yield from faults_of_derived_keys(table)
+    yield from (f"report {each}: stands twice" for each in repeated(report.name for report in table.reports))
+    for report in table.reports:
+        yield from (f"report {report.name}: {what}" for what in faults_of_report(table, report))
 
 
 def faults_of_names(table):
@@ -238,3 +269,36 @@ def faults_of_derived_keys(table):
         for part in key.writers:
             if part in told and key.name not in told[part] and key.name not in ADDED and key.places != ["event"]:
                 yield f"key {key.name}: {part} writes it, and none of its messages has it"
+
+
+def faults_of_report(table, report):
+    if not re.fullmatch("[a-z]+( [a-z]+)*", report.name):
+        yield "its name isn't words"
+    if not report.text.endswith("."):
+        yield "its text is no sentence"
+    if report.category not in [row.name for row in table.categories]:
+        yield f"there is no category {report.category}"
+    if report.type not in [row.name for row in table.types]:
+        yield f"there is no type {report.type}"
+    keys = {key.name: key for key in table.keys if "message" in key.places and not key.is_pattern()}
+    for what in ("key", "argument"):
+        names = [getattr(each, what) for each in report.fields]
+        yield from (f"{what} {name} stands twice" for name in repeated(filter(None, names)))
+    for each in report.fields:
+        if each.key not in keys:
+            yield f"there is no key {each.key}"
+        elif fault := fault_of_field(each, keys[each.key]):
+            yield f"{each.key} {fault}"
+
+
+def fault_of_field(each, key):
+    kinds = {"boolean": bool, "integer": int, "number": float, "text": str}
+    if key.kind not in kinds:
+        return "is of any kind"
+    if (each.constant is None) != bool(each.argument):
+        return "has either a value or an argument"
+    if each.constant is not None and type(each.constant) is not kinds[key.kind]:
+        return f"isn't {each.constant!r}"
+    if each.argument and not re.fullmatch("[a-z]+", each.argument):
+        return "has an argument whose name is no word"
+    return "is no text of Hz" if each.hertz and (key.kind, key.unit) != ("text", "Hz") else ""

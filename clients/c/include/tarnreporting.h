@@ -69,6 +69,8 @@ typedef enum tarnreporting_kind tarnreporting_kind;
 #define TARNREPORTING_MOST_KEYS 64
 #define TARNREPORTING_MOST_KEY_BYTES 255
 #define TARNREPORTING_MOST_TEXT_BYTES 1024
+/* Different sets of keys and kinds that a session remembers for tarnreporting_post_fields(). */
+#define TARNREPORTING_MOST_FIELD_SETS 64
 
 typedef struct tarnreporting_value tarnreporting_value;
 struct tarnreporting_value {
@@ -122,6 +124,16 @@ struct tarnreporting_shape_options {
   uint32_t type; /* 0 to 65535 */
   const tarnreporting_key* keys;
   size_t key_count;
+};
+
+typedef struct tarnreporting_message_options tarnreporting_message_options;
+struct tarnreporting_message_options {
+  size_t size;
+  uint32_t category;
+  uint32_t type; /* 0 to 65535 */
+  const tarnreporting_field* fields;
+  size_t field_count;
+  uint64_t stamp_ns; /* of the event, in nanoseconds since 1970 UTC; 0: the time of the call */
 };
 
 #define TARNREPORTING_NO_SYSTEM_CALL 1U /* the helper thread looks every 50 ms instead */
@@ -194,6 +206,11 @@ TARNREPORTING_API int tarnreporting_post(tarnreporting_writer* writer, const tar
 /* The same with the time of the event, in nanoseconds since 1970 UTC. */
 TARNREPORTING_API int tarnreporting_post_at(tarnreporting_writer* writer, const tarnreporting_shape* shape,
                                             uint64_t stamp_ns, const tarnreporting_value* values, size_t count);
+/* Posts a message of any keys, all different, without a shape declared for it. Not for real-time threads: it may wait
+ * for a lock and allocate. TARNREPORTING_TOO_LARGE also where the session remembers as many sets of keys and kinds as
+ * it may, and the service hasn't taken the messages of the oldest yet. */
+TARNREPORTING_API int tarnreporting_post_fields(tarnreporting_writer* writer, tarnreporting_session* session,
+                                                const tarnreporting_message_options* options);
 
 static inline tarnreporting_value tarnreporting_integer(int64_t value) {
   tarnreporting_value made = {TARNREPORTING_INTEGER, 0, {0}};

@@ -163,3 +163,13 @@ int tarnreporting_post_at(tarnreporting_writer* writer, const tarnreporting_shap
   if (writer == nullptr || shape == nullptr || (values == nullptr && count != 0)) return TARNREPORTING_ARGUMENT;
   return post(*writer, *shape, &stamp_ns, values, count);
 }
+
+int tarnreporting_post_fields(tarnreporting_writer* writer, tarnreporting_session* session,
+                              const tarnreporting_message_options* options) {
+  tarnreporting_message_options mine;
+  if (writer == nullptr || session == nullptr || options == nullptr || !readOptions(mine, options)) {
+    return TARNREPORTING_ARGUMENT;
+  }
+  const int result = checkAlive(*session->client);
+  return result == TARNREPORTING_OK ? session->client->postFields(*writer, *session, mine) : result;
+}

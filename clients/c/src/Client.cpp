@@ -135,6 +135,7 @@ int tarnreporting_client::close(std::uint32_t timeoutMs, std::uint64_t* left, bo
 
 void tarnreporting_client::freeAll() noexcept {
   link_.close();
+  linked_ = false;
   while (sessions_ != nullptr) {
     remove(*sessions_);
   }

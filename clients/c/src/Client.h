@@ -13,23 +13,34 @@
 #include "clients/c/src/Link.h"
 #include "clients/c/src/Writer.h"
 
+namespace tarn::reporting {
+
+inline constexpr std::size_t kMostWriters = 32;
+// Shapes of a session that posting of fields made.
+inline constexpr std::uint32_t kMostFieldShapes = TARNREPORTING_MOST_FIELD_SETS;
+
+// Where each writer was at some moment; 0 where there was none.
+struct Heads {
+  std::uint64_t at[kMostWriters] = {};
+};
+
+}  // namespace tarn::reporting
+
 struct tarnreporting_session {
   tarnreporting_client* client = nullptr;
   tarnreporting_session* next = nullptr;
-  tarnreporting_shape* shapes = nullptr;
+  tarnreporting_shape* shapes = nullptr;  // those of fields in the order of their last use
+  std::uint32_t fieldShapes = 0;
   std::uint32_t serviceType = 0;
   tarn::reporting::Bytes configuration;  // one map
   std::int64_t reporterID = 0;           // on this connection
   bool announced = false;                // on this connection
   bool everAnnounced = false;
   bool ending = false;
-  // Where each writer was when the session was ended; what lies before belongs to it.
-  std::uint64_t endHeads[32] = {};
+  tarn::reporting::Heads end;  // when the session was ended: what lies before belongs to it
 };
 
 namespace tarn::reporting {
-
-inline constexpr std::size_t kMostWriters = 32;
 
 // What came of writers that are gone.
 struct Totals {
@@ -60,6 +71,7 @@ struct tarnreporting_client {
   int beginSession(const tarnreporting_session_options& options, Session** made) noexcept;
   int endSession(Session& session) noexcept;
   int declareShape(Session& session, const tarnreporting_shape_options& options, Shape** made) noexcept;
+  int postFields(Writer& writer, Session& session, const tarnreporting_message_options& options) noexcept;
   int openWriter(std::uint32_t ringBytes, std::uint32_t flags, Writer** made) noexcept;
   int closeWriter(Writer& writer) noexcept;
   int flush(std::uint32_t timeoutMs) noexcept;
@@ -89,11 +101,19 @@ struct tarnreporting_client {
   void announce(Session& session) noexcept;
   void announce(const Shape& shape) noexcept;
   void forget(std::uint32_t shapeNumber) noexcept;
+  // The shape of that request is, or with 0 all are.
+  void forgotten(std::uint64_t request) noexcept;
   void markEnding(Session& session) noexcept;
   void tendSessions() noexcept;
-  bool isDrained(const Session& session) const noexcept;
+  tarnreporting_shape* makeShape(Session& session, const tarnreporting_shape_options& options) noexcept;
+  int enter(Shape& shape) noexcept;
+  int findFieldShape(Session& session, const tarnreporting_shape_options& options, Shape** found) noexcept;
+  bool makeRoomForFieldShape(Session& session) noexcept;
+  void mark(tarn::reporting::Heads& heads) const noexcept;
+  bool isDrained(const tarn::reporting::Heads& heads) const noexcept;
   void finish(Session& session) noexcept;
   void remove(Session& session) noexcept;
+  void removeShape(Shape& shape) noexcept;
   void tendWriters(std::int64_t now) noexcept;
   void openRing(Writer& writer) noexcept;
   void lookAfterQuietWriters() noexcept;
@@ -103,6 +123,7 @@ struct tarnreporting_client {
   bool isAllTaken() const noexcept;
   std::uint64_t untaken() const noexcept;
   bool takeShapeNumber(std::uint32_t& number) noexcept;
+  void giveBackShapeNumber(std::uint32_t number) noexcept;
   void freeAll() noexcept;
 
   std::uint32_t* alive_ = nullptr;  // a page that reads as zero in a child
@@ -123,6 +144,8 @@ struct tarnreporting_client {
   Session* sessions_ = nullptr;
   Writer* writers_[tarn::reporting::kMostWriters] = {};
   std::uint64_t shapeNumbers_[TARNRING_MOST_SHAPES / 64] = {};  // a bit for each that is in use
+  std::uint64_t forgetRequests_[TARNRING_MOST_SHAPES] = {};     // by number: the one that isn't answered yet
+  std::uint32_t forgetting_ = 0;
   tarn::reporting::Totals gone_;
   std::uint64_t requestsRefused_ = 0;
   char lastError_[sizeof(tarnreporting_state::last_error)] = {};

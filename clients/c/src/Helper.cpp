@@ -34,6 +34,16 @@ bool isTaken(const tarnreporting_writer& writer) noexcept {
   return loadAcquire(writer.header->taken) == loadAcquire(writer.header->head);
 }
 
+// The next writer in this place begins at 0.
+void forgetWriter(tarnreporting_session& session, std::size_t slot) noexcept {
+  session.end.at[slot] = 0;
+  for (tarnreporting_shape* shape = session.shapes; shape != nullptr; shape = shape->next) {
+    if (shape->lastUse != nullptr) {
+      shape->lastUse->at[slot] = 0;
+    }
+  }
+}
+
 }  // namespace
 
 namespace tarn::reporting {
@@ -136,6 +146,7 @@ bool tarnreporting_client::connectSomewhere() noexcept {
 // The sessions ended with their connection, the rings are without a reader.
 void tarnreporting_client::disconnected(std::int64_t now) noexcept {
   linked_ = false;
+  forgotten(0);
   constexpr char kEnded[] = "the connection to the service ended";
   noteError(kEnded, sizeof kEnded - 1);
   nextConnect_ = now + kFirstPause;
@@ -156,6 +167,7 @@ void tarnreporting_client::take(const ReplyFront& reply) noexcept {
     writer->link = reply.isError ? Writer::Link::None : Writer::Link::Open;
     writer->retryAt = monotonicNow() + kRetryRing;
   }
+  forgotten(reply.id);
   if (reply.isError) {
     ++requestsRefused_;
     refusalToTell_ = true;
@@ -189,7 +201,7 @@ void tarnreporting_client::tendWriters(std::int64_t now) noexcept {
       retire(*writer);
       writer = nullptr;
       for (Session* session = sessions_; session != nullptr; session = session->next) {
-        session->endHeads[slot] = 0;  // the next writer here begins at 0
+        forgetWriter(*session, slot);
       }
     } else if (linked_ && writer->link == Writer::Link::None && now >= writer->retryAt) {
       openRing(*writer);

@@ -13,6 +13,10 @@
 #include "clients/c/src/Bytes.h"
 #include "clients/ring/RingProducer.h"
 
+namespace tarn::reporting {
+struct Heads;
+}
+
 // One a declared shape; never changes while it may be posted with.
 struct tarnreporting_shape {
   tarnreporting_client* client = nullptr;
@@ -24,7 +28,8 @@ struct tarnreporting_shape {
   // What declareShape says but for its number and the reporter.
   std::uint32_t category = 0;
   std::uint32_t type = 0;
-  tarn::reporting::Bytes keysAndKinds;  // two arrays, each after its name
+  tarn::reporting::Bytes keysAndKinds;        // two arrays, each after its name
+  tarn::reporting::Heads* lastUse = nullptr;  // of a shape that posting of fields made
 };
 
 namespace tarn::reporting {

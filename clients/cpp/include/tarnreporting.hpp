@@ -102,12 +102,13 @@ class Shape {
   const tarnreporting_shape* shape_;
 };
 
+struct Field {
+  const char* key;
+  Value value;
+};
+
 class Session {
  public:
-  struct Field {
-    const char* key;
-    Value value;
-  };
   struct Options {
     std::uint16_t serviceType = 0;
     const char* application = nullptr;
@@ -137,6 +138,7 @@ class Session {
     tarnreporting_session* const session = std::exchange(session_, nullptr);
     return Result(session != nullptr ? tarnreporting_session_end(session) : TARNREPORTING_OK);
   }
+  tarnreporting_session* raw() const noexcept { return session_; }
 
  private:
   friend class Client;
@@ -167,6 +169,19 @@ class Writer {
       return Result(tarnreporting_post(writer_, shape.raw(), list, sizeof...(values)));
     }
   }
+  // Of any keys, without a shape: not for real-time threads, see tarnreporting_post_fields().
+  Result post(Session& session, std::uint32_t category, std::uint16_t type,
+              std::initializer_list<Field> fields) noexcept {
+    if (fields.size() > TARNREPORTING_MOST_KEYS) return Result(TARNREPORTING_TOO_LARGE);
+    tarnreporting_field list[TARNREPORTING_MOST_KEYS];
+    std::size_t count = 0;
+    for (const Field& field : fields) {
+      list[count++] = {field.key, field.value.raw()};
+    }
+    const tarnreporting_message_options options = {sizeof options, category, type, list, count, 0};
+    return Result(tarnreporting_post_fields(writer_, session.raw(), &options));
+  }
+  tarnreporting_writer* raw() const noexcept { return writer_; }
   Result close() noexcept {
     tarnreporting_writer* const writer = std::exchange(writer_, nullptr);
     return Result(writer != nullptr ? tarnreporting_writer_close(writer) : TARNREPORTING_OK);
@@ -199,7 +214,7 @@ class Client {
 
   Session begin(const Session::Options& options) {
     std::vector<tarnreporting_field> fields;
-    for (const Session::Field& field : options.configuration) {
+    for (const Field& field : options.configuration) {
       fields.push_back({field.key, field.value.raw()});
     }
     tarnreporting_session_options raw = {};

@@ -1,12 +1,16 @@
-/* A program of somebody else: one message, with no service there to take it. */
+/* A program of somebody else: a message and a report, with no service there to take it. */
 #include <stdio.h>
 #include <tarnreporting.h>
+#include <tarnreporting_messages.h>
+#include <tarnreporting_reports.h>
 
 int main(void) {
-  const tarnreporting_key keys[] = {{"volume", TARNREPORTING_DOUBLE}, {"muted", TARNREPORTING_BOOLEAN}};
+  const tarnreporting_key keys[] = {{TARN_KEY_KV_SESSION_VOLUME, TARNREPORTING_DOUBLE},
+                                    {"muted", TARNREPORTING_BOOLEAN}};
   tarnreporting_session_options session_options = {0};
   tarnreporting_shape_options shape_options = {0};
   tarnreporting_state state = {0};
+  tarnreporting_reports reports;
   tarnreporting_client* client;
   tarnreporting_session* session;
   tarnreporting_shape* shape;
@@ -14,11 +18,11 @@ int main(void) {
   tarnreporting_value values[2];
   uint64_t left = 0;
   session_options.size = sizeof session_options;
-  session_options.service_type = 7;
+  session_options.service_type = TARN_SERVICE_LONG_FORM_AUDIO;
   session_options.application = "sys.oxbow.music";
   shape_options.size = sizeof shape_options;
-  shape_options.category = 14;
-  shape_options.type = 16;
+  shape_options.category = TARN_CATEGORY_VOLUME;
+  shape_options.type = TARN_TYPE_SIMPLE;
   shape_options.keys = keys;
   shape_options.key_count = 2;
   state.size = sizeof state;
@@ -27,6 +31,8 @@ int main(void) {
   if (tarnreporting_client_open(NULL, &client) || tarnreporting_session_begin(client, &session_options, &session) ||
       tarnreporting_shape_declare(session, &shape_options, &shape) ||
       tarnreporting_writer_open(client, NULL, &writer) || tarnreporting_post(writer, shape, values, 2) ||
+      tarnreporting_reports_declare(session, &reports) ||
+      tarnreporting_report_output_running(writer, &reports, 0.5, "Speaker") ||
       tarnreporting_client_state(client, &state)) {
     return 1;
   }

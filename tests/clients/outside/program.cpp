@@ -2,6 +2,8 @@
 #include <cstdio>
 #include <optional>
 #include <tarnreporting.hpp>
+#include <tarnreporting_messages.hpp>
+#include <tarnreporting_reports.hpp>
 #include <utility>
 
 int main() {
@@ -15,6 +17,9 @@ int main() {
     tarnreporting::Writer writer = client.writer(4096);
     static_assert(noexcept(writer.post(volume, 0.5, "BuiltInSpeaker")));
     if (!writer.post(volume, 0.5, "BuiltInSpeaker").ok() || writer.post(volume, "no number", 1).ok()) return 1;
+    const tarnreporting::Reports reports(session);
+    if (!reports.outputRunning(writer, 0.5, "Speaker").ok()) return 1;
+    if (writer.post(session, 14, 16, {{tarnreporting::keys::kKvSessionVolume.data(), 0.5}, {"", 1}}).ok()) return 1;
     posted = client.state().posted;
     try {
       session.shape(14, 16, {{"", tarnreporting::Kind::Double}});

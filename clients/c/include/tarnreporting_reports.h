@@ -1,0 +1,208 @@
+/* Reports: messages that an engine posts without knowing a key, one function each. docs/messages.md lists them.
+ *
+ *   tarnreporting_reports reports;
+ *   tarnreporting_reports_declare(session, &reports);                          once
+ *   tarnreporting_report_output_running(writer, &reports, 0.5, "Speaker");     in the audio thread
+ *
+ * Each posts one message as tarnreporting_post() does, with its promises and its results. A text that is null counts as
+ * empty. The reports are gone with their session; each takes one of the client's shapes.
+ *
+ * Made by tools/dictionary/generate.py from dictionary/messages.toml: change that, not this. */
+#pragma once
+
+#include <string.h>
+#include <tarnreporting.h>
+
+#ifdef __cplusplus
+extern "C" {
+#endif
+
+/* clang-format off */
+
+enum {
+  TARNREPORTING_REPORT_OUTPUT_RUNNING,
+  TARNREPORTING_REPORT_OUTPUT_STOPPED,
+  TARNREPORTING_REPORT_VOLUME_CHANGED,
+  TARNREPORTING_REPORT_ROUTE_CHANGED,
+  TARNREPORTING_REPORT_INPUT_RUNNING,
+  TARNREPORTING_REPORT_CODEC_CHANGED,
+  TARNREPORTING_REPORT_INPUT_STOPPED,
+  TARNREPORTING_REPORT_OVERLOAD,
+  TARNREPORTING_REPORT_ERROR,
+  TARNREPORTING_REPORT_SESSION_DURATION,
+  TARNREPORTING_REPORT_COUNT
+};
+
+typedef struct tarnreporting_reports tarnreporting_reports;
+struct tarnreporting_reports {
+  tarnreporting_shape* shapes[TARNREPORTING_REPORT_COUNT];
+};
+
+static inline tarnreporting_value tarnreporting_report_text(const char* text) {
+  const size_t length = text != NULL ? strlen(text) : 0;
+  return tarnreporting_text(text, length < UINT32_MAX ? (uint32_t)length : UINT32_MAX);
+}
+
+/* Of a rate in Hz, as messages have it: 48000.0. Writes up to 12 bytes to `room`. */
+static inline tarnreporting_value tarnreporting_report_hertz(uint32_t rate, char* room) {
+  uint32_t digits = 1;
+  uint32_t rest;
+  uint32_t at;
+  for (rest = rate; rest >= 10; rest /= 10) {
+    ++digits;
+  }
+  for (at = digits; at > 0; --at) {
+    room[at - 1] = (char)('0' + rate % 10);
+    rate /= 10;
+  }
+  room[digits] = '.';
+  room[digits + 1] = '0';
+  return tarnreporting_text(room, digits + 2);
+}
+
+/* Declares all of them for the session. */
+static inline int tarnreporting_reports_declare(tarnreporting_session* session, tarnreporting_reports* reports) {
+  static const struct {
+    uint32_t category;
+    uint32_t type;
+    size_t key_count;
+    tarnreporting_key keys[4];
+  } rows[TARNREPORTING_REPORT_COUNT] = {
+    {4, 1, 3, {{"session_output_running", TARNREPORTING_BOOLEAN}, {"KvSessionVolume", TARNREPORTING_DOUBLE},
+               {"active_devices", TARNREPORTING_TEXT_VALUE}}},
+    {4, 2, 1, {{"session_output_running", TARNREPORTING_BOOLEAN}}},
+    {14, 0, 1, {{"KvSessionVolume", TARNREPORTING_DOUBLE}}},
+    {10, 0, 1, {{"active_devices", TARNREPORTING_TEXT_VALUE}}},
+    {3, 1, 4, {{"session_input_running", TARNREPORTING_BOOLEAN}, {"active_devices", TARNREPORTING_TEXT_VALUE},
+               {"vp_config_primary_vocoder", TARNREPORTING_TEXT_VALUE},
+               {"vp_config_primary_vocoderFs", TARNREPORTING_TEXT_VALUE}}},
+    {3, 5, 2, {{"vp_config_primary_vocoder", TARNREPORTING_TEXT_VALUE},
+               {"vp_config_primary_vocoderFs", TARNREPORTING_TEXT_VALUE}}},
+    {3, 2, 1, {{"session_input_running", TARNREPORTING_BOOLEAN}}},
+    {7, 6, 3, {{"issue_type", TARNREPORTING_TEXT_VALUE}, {"smallest_buffer_frame_size", TARNREPORTING_INTEGER},
+               {"io_cycle", TARNREPORTING_INTEGER}}},
+    {11, 6, 1, {{"issue_type", TARNREPORTING_TEXT_VALUE}}},
+    {1, 2, 1, {{"session_duration", TARNREPORTING_DOUBLE}}},
+  };
+  size_t i;
+  if (reports == NULL) return TARNREPORTING_ARGUMENT;
+  for (i = 0; i < TARNREPORTING_REPORT_COUNT; ++i) {
+    tarnreporting_shape_options options;
+    int result;
+    options.size = sizeof options;
+    options.category = rows[i].category;
+    options.type = rows[i].type;
+    options.keys = rows[i].keys;
+    options.key_count = rows[i].key_count;
+    result = tarnreporting_shape_declare(session, &options, &reports->shapes[i]);
+    if (result != TARNREPORTING_OK) return result;
+  }
+  return TARNREPORTING_OK;
+}
+
+/* Output runs from now on, at this volume (0 to 1), on this route. */
+static inline int tarnreporting_report_output_running(tarnreporting_writer* writer,
+                                                      const tarnreporting_reports* reports, double volume,
+                                                      const char* route) {
+  tarnreporting_value values[3];
+  values[0] = tarnreporting_boolean(1);
+  values[1] = tarnreporting_double(volume);
+  values[2] = tarnreporting_report_text(route);
+  if (reports == NULL) return TARNREPORTING_ARGUMENT;
+  return tarnreporting_post(writer, reports->shapes[TARNREPORTING_REPORT_OUTPUT_RUNNING], values, 3);
+}
+
+/* Output runs no more. */
+static inline int tarnreporting_report_output_stopped(tarnreporting_writer* writer,
+                                                      const tarnreporting_reports* reports) {
+  tarnreporting_value values[1];
+  values[0] = tarnreporting_boolean(0);
+  if (reports == NULL) return TARNREPORTING_ARGUMENT;
+  return tarnreporting_post(writer, reports->shapes[TARNREPORTING_REPORT_OUTPUT_STOPPED], values, 1);
+}
+
+/* The volume is this from now on, 0 to 1. */
+static inline int tarnreporting_report_volume_changed(tarnreporting_writer* writer,
+                                                      const tarnreporting_reports* reports, double volume) {
+  tarnreporting_value values[1];
+  values[0] = tarnreporting_double(volume);
+  if (reports == NULL) return TARNREPORTING_ARGUMENT;
+  return tarnreporting_post(writer, reports->shapes[TARNREPORTING_REPORT_VOLUME_CHANGED], values, 1);
+}
+
+/* These devices play or record from now on. */
+static inline int tarnreporting_report_route_changed(tarnreporting_writer* writer, const tarnreporting_reports* reports,
+                                                     const char* route) {
+  tarnreporting_value values[1];
+  values[0] = tarnreporting_report_text(route);
+  if (reports == NULL) return TARNREPORTING_ARGUMENT;
+  return tarnreporting_post(writer, reports->shapes[TARNREPORTING_REPORT_ROUTE_CHANGED], values, 1);
+}
+
+/* Input runs from now on, on this route, with this voice codec at this sampling rate in Hz. */
+static inline int tarnreporting_report_input_running(tarnreporting_writer* writer, const tarnreporting_reports* reports,
+                                                     const char* route, const char* codec, uint32_t rate) {
+  char room[12];
+  tarnreporting_value values[4];
+  values[0] = tarnreporting_boolean(1);
+  values[1] = tarnreporting_report_text(route);
+  values[2] = tarnreporting_report_text(codec);
+  values[3] = tarnreporting_report_hertz(rate, room);
+  if (reports == NULL) return TARNREPORTING_ARGUMENT;
+  return tarnreporting_post(writer, reports->shapes[TARNREPORTING_REPORT_INPUT_RUNNING], values, 4);
+}
+
+/* The voice codec is this from now on, at this sampling rate in Hz. */
+static inline int tarnreporting_report_codec_changed(tarnreporting_writer* writer, const tarnreporting_reports* reports,
+                                                     const char* codec, uint32_t rate) {
+  char room[12];
+  tarnreporting_value values[2];
+  values[0] = tarnreporting_report_text(codec);
+  values[1] = tarnreporting_report_hertz(rate, room);
+  if (reports == NULL) return TARNREPORTING_ARGUMENT;
+  return tarnreporting_post(writer, reports->shapes[TARNREPORTING_REPORT_CODEC_CHANGED], values, 2);
+}
+
+/* Input runs no more. */
+static inline int tarnreporting_report_input_stopped(tarnreporting_writer* writer,
+                                                     const tarnreporting_reports* reports) {
+  tarnreporting_value values[1];
+  values[0] = tarnreporting_boolean(0);
+  if (reports == NULL) return TARNREPORTING_ARGUMENT;
+  return tarnreporting_post(writer, reports->shapes[TARNREPORTING_REPORT_INPUT_STOPPED], values, 1);
+}
+
+/* A cycle came too late, or a buffer ran empty: its size in frames, and which cycle it was. */
+static inline int tarnreporting_report_overload(tarnreporting_writer* writer, const tarnreporting_reports* reports,
+                                                int64_t frames, int64_t cycle) {
+  tarnreporting_value values[3];
+  values[0] = tarnreporting_text("overload", 8);
+  values[1] = tarnreporting_integer(frames);
+  values[2] = tarnreporting_integer(cycle);
+  if (reports == NULL) return TARNREPORTING_ARGUMENT;
+  return tarnreporting_post(writer, reports->shapes[TARNREPORTING_REPORT_OVERLOAD], values, 3);
+}
+
+/* Something else went wrong; what, in a word or two. */
+static inline int tarnreporting_report_error(tarnreporting_writer* writer, const tarnreporting_reports* reports,
+                                             const char* what) {
+  tarnreporting_value values[1];
+  values[0] = tarnreporting_report_text(what);
+  if (reports == NULL) return TARNREPORTING_ARGUMENT;
+  return tarnreporting_post(writer, reports->shapes[TARNREPORTING_REPORT_ERROR], values, 1);
+}
+
+/* What the session was for is over, and was active for so many seconds. */
+static inline int tarnreporting_report_session_duration(tarnreporting_writer* writer,
+                                                        const tarnreporting_reports* reports, double seconds) {
+  tarnreporting_value values[1];
+  values[0] = tarnreporting_double(seconds);
+  if (reports == NULL) return TARNREPORTING_ARGUMENT;
+  return tarnreporting_post(writer, reports->shapes[TARNREPORTING_REPORT_SESSION_DURATION], values, 1);
+}
+
+/* clang-format on */
+
+#ifdef __cplusplus
+}
+#endif

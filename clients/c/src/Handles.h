@@ -1,0 +1,22 @@
+// Handles are made and freed without the C++ runtime. Stateless. Threads: any.
+#pragma once
+
+#include <cstdlib>
+#include <new>
+
+namespace tarn::reporting {
+
+// Null when there is no memory.
+template <class Handle>
+Handle* makeHandle() noexcept {
+  void* const memory = std::malloc(sizeof(Handle));
+  return memory != nullptr ? ::new (memory) Handle : nullptr;
+}
+
+template <class Handle>
+void freeHandle(Handle* handle) noexcept {
+  handle->~Handle();
+  std::free(handle);
+}
+
+}  // namespace tarn::reporting

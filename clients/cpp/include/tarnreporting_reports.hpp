@@ -1,0 +1,82 @@
+// Reports: messages that an engine posts without knowing a key, one operation each. docs/messages.md lists them.
+//
+//   const tarnreporting::Reports reports(session);         // once; throws tarnreporting::Error
+//   reports.outputRunning(writer, 0.5, "Speaker");         // in the audio thread
+//
+// Each posts one message as Writer::post() does. The reports may not be used after their session ended.
+//
+// Made by tools/dictionary/generate.py from dictionary/messages.toml: change that, not this.
+#pragma once
+
+#include <tarnreporting.hpp>
+#include <tarnreporting_reports.h>
+
+#include <cstdint>
+
+namespace tarnreporting {
+
+// clang-format off
+class Reports {
+ public:
+  explicit Reports(const Session& session) {
+    if (const int code = tarnreporting_reports_declare(session.raw(), &reports_); code != TARNREPORTING_OK) {
+      throw Error(code);
+    }
+  }
+
+  // Output runs from now on, at this volume (0 to 1), on this route.
+  Result outputRunning(Writer& writer, double volume, const char* route) const noexcept {
+    return Result(tarnreporting_report_output_running(writer.raw(), &reports_, volume, route));
+  }
+
+  // Output runs no more.
+  Result outputStopped(Writer& writer) const noexcept {
+    return Result(tarnreporting_report_output_stopped(writer.raw(), &reports_));
+  }
+
+  // The volume is this from now on, 0 to 1.
+  Result volumeChanged(Writer& writer, double volume) const noexcept {
+    return Result(tarnreporting_report_volume_changed(writer.raw(), &reports_, volume));
+  }
+
+  // These devices play or record from now on.
+  Result routeChanged(Writer& writer, const char* route) const noexcept {
+    return Result(tarnreporting_report_route_changed(writer.raw(), &reports_, route));
+  }
+
+  // Input runs from now on, on this route, with this voice codec at this sampling rate in Hz.
+  Result inputRunning(Writer& writer, const char* route, const char* codec, std::uint32_t rate) const noexcept {
+    return Result(tarnreporting_report_input_running(writer.raw(), &reports_, route, codec, rate));
+  }
+
+  // The voice codec is this from now on, at this sampling rate in Hz.
+  Result codecChanged(Writer& writer, const char* codec, std::uint32_t rate) const noexcept {
+    return Result(tarnreporting_report_codec_changed(writer.raw(), &reports_, codec, rate));
+  }
+
+  // Input runs no more.
+  Result inputStopped(Writer& writer) const noexcept {
+    return Result(tarnreporting_report_input_stopped(writer.raw(), &reports_));
+  }
+
+  // A cycle came too late, or a buffer ran empty: its size in frames, and which cycle it was.
+  Result overload(Writer& writer, std::int64_t frames, std::int64_t cycle) const noexcept {
+    return Result(tarnreporting_report_overload(writer.raw(), &reports_, frames, cycle));
+  }
+
+  // Something else went wrong; what, in a word or two.
+  Result error(Writer& writer, const char* what) const noexcept {
+    return Result(tarnreporting_report_error(writer.raw(), &reports_, what));
+  }
+
+  // What the session was for is over, and was active for so many seconds.
+  Result sessionDuration(Writer& writer, double seconds) const noexcept {
+    return Result(tarnreporting_report_session_duration(writer.raw(), &reports_, seconds));
+  }
+
+ private:
+  tarnreporting_reports reports_ = {};
+};
+// clang-format on
+
+}  // namespace tarnreporting
