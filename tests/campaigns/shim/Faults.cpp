@@ -124,6 +124,11 @@ int tarnOpen64Checked(const char* path, int flags) {
   return tarnOpen64(path, flags);
 }
 
+int tarnOpenAtChecked(int folder, const char* path, int flags) __asm__("__openat_2");
+int tarnOpenAtChecked(int folder, const char* path, int flags) {
+  return tarnOpenAt(folder, path, flags);
+}
+
 ssize_t tarnRead(int file, void* data, std::size_t size) __asm__("read");
 ssize_t tarnRead(int file, void* data, std::size_t size) {
   static const auto next = nextFunction<ssize_t(int, void*, std::size_t)>("read");
@@ -145,6 +150,16 @@ ssize_t tarnPRead64(int file, void* data, std::size_t size, off64_t at) __asm__(
 ssize_t tarnPRead64(int file, void* data, std::size_t size, off64_t at) {
   static const auto next = nextFunction<ssize_t(int, void*, std::size_t, off64_t)>("pread64");
   return failsOrShortens(Kind::PRead, size) ? -1 : next(file, data, size, at);
+}
+
+ssize_t tarnPReadChecked(int file, void* data, std::size_t size, off_t at, std::size_t) __asm__("__pread_chk");
+ssize_t tarnPReadChecked(int file, void* data, std::size_t size, off_t at, std::size_t) {
+  return tarnPRead(file, data, size, at);
+}
+
+ssize_t tarnPRead64Checked(int file, void* data, std::size_t size, off64_t at, std::size_t) __asm__("__pread64_chk");
+ssize_t tarnPRead64Checked(int file, void* data, std::size_t size, off64_t at, std::size_t) {
+  return tarnPRead64(file, data, size, at);
 }
 
 ssize_t tarnWrite(int file, const void* data, std::size_t size) __asm__("write");
