@@ -8,9 +8,13 @@ from service import settled
 ROUNDS_A_STORE = 10
 
 
+def no_figures():
+    return dict(kills=0, answered=0, rows=0, committed_lost=0, settled_lost=0, late_lost=0, doubled=0,
+                lost_within_200ms=0, oldest_lost_ms=0.0, restarts_refused=0)
+
+
 def run(context, figures):
-    figures.update(kills=0, answered=0, rows=0, committed_lost=0, settled_lost=0, late_lost=0, doubled=0,
-                   lost_within_200ms=0, oldest_lost_ms=0.0, restarts_refused=0)
+    figures.update(no_figures())
     while context.left() > 0:
         service = context.new_service()
         key, row = 1, 0
