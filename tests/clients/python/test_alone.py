@@ -163,14 +163,15 @@ class Lives(Alone):
         async def main():
             async with tarnreporting.Client(self.socket) as client:
                 session = client.session()
+                session.output_stopped()  # there is something to flush, whichever of the two is first
                 ran = []
 
                 async def other():
                     ran.append(session.output_stopped())
 
                 flushed, _ = await asyncio.gather(client.flush_async(0.05), other())
-                self.assertEqual((flushed, ran, client.stats().posted), (False, [True], 1))
-                self.assertEqual(await client.close_async(0), 1)
+                self.assertEqual((flushed, ran, client.stats().posted), (False, [True], 2))
+                self.assertEqual(await client.close_async(0), 2)
 
         asyncio.run(main())
 
