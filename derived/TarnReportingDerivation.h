@@ -1,28 +1,48 @@
 // What the producers that walk over a session's log at its stop do alike: walk, and send what came out.
 //
-// A walk is a class with `void take(const plist::Dictionary& payload)`, called for each message in order, and
-// `TarnReportingSessionMessages finish()`, called once after the last.
+// A walk is a class with `void take(const plist::Dictionary& payload)`, called for each message in order,
+// `void keep()`, called before payloads that it took may go, and `TarnReportingSessionMessageList finish()`, called
+// once after the last.
 //
 // Threads: the server queue.
 #pragma once
 
+#include <cstddef>
 #include <memory>
 #include <string_view>
 #include <utility>
 
 #include "service/vocabulary/TarnReportingLog.h"
 #include "session/TarnReportingSession.h"
-#include "session/TarnReportingSessionMessage.h"
+#include "session/TarnReportingSessionMessageList.h"
+#include "session/TarnReportingSessionWorkerUtility.h"
 
 namespace tarn {
 
-// What the walk makes of these messages, in order.
-template <class Walk>
-TarnReportingSessionMessages TarnReportingDerivedMessages(const TarnReportingSessionMessages& messages, Walk walk) {
-  for (const auto& message : messages) {
-    walk.take(message->message());
+// What the walk makes of the messages that `isLeftOut(index)` doesn't tell to leave out, in order.
+template <class IsLeftOut, class Walk>
+TarnReportingSessionMessageList TarnReportingDerivedMessages(const TarnReportingSessionMessageList& messages,
+                                                             IsLeftOut isLeftOut, Walk walk) {
+  for (auto at = messages.begin(); at != messages.end(); ++at) {
+    if (at.beginsPage()) {
+      walk.keep();
+    }
+    if (!isLeftOut(at.index())) {
+      walk.take((*at)->message());
+    }
   }
   return walk.finish();
+}
+template <class Walk>
+TarnReportingSessionMessageList TarnReportingDerivedMessages(const TarnReportingSessionMessageList& messages,
+                                                             Walk walk) {
+  return TarnReportingDerivedMessages(
+      messages, [](std::size_t) { return false; }, std::move(walk));
+}
+template <class Walk>
+TarnReportingSessionMessageList TarnReportingDerivedMessages(const TarnReportingCombinedMessages& combined, Walk walk) {
+  return TarnReportingDerivedMessages(
+      combined.all(), [&](std::size_t index) { return combined.isMerged(index); }, std::move(walk));
 }
 
 // Derives messages from a session (`derive(session)`) and sends them into it, in order. Before the first, `sendingText`
@@ -32,7 +52,7 @@ void TarnReportingSendDerivedMessages(const std::shared_ptr<TarnReportingSession
                                       const TarnReportingLogger& log, const LogText& sendingText,
                                       const Derive& derive) {
   if (!session || session->messages().empty()) return;
-  const TarnReportingSessionMessages derived = derive(std::as_const(*session));
+  const TarnReportingSessionMessageList derived = derive(std::as_const(*session));
   if (derived.empty()) return;
   log(LogLevel::Default, sendingText, session->reporterID());
   for (const auto& message : derived) {

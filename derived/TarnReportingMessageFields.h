@@ -2,8 +2,8 @@
 // message, or the running state that such messages are laid over one after the other.
 //
 // `Field` is an enumeration that numbers the values from 0, with `Count` after the last. The values lie in the payload
-// (or wherever they were set from), which must stay as it is meanwhile. A payload is never copied: a state of all its
-// keys, merged for every message, would cost more than everything else at a session's stop.
+// (or wherever they were set from), which must stay as it is meanwhile, or until keepIn(). A payload is never copied: a
+// state of all its keys, merged for every message, would cost more than everything else at a session's stop.
 //
 // Threads: the server queue.
 #pragma once
@@ -11,11 +11,13 @@
 #include <algorithm>
 #include <array>
 #include <cstddef>
+#include <utility>
 #include <vector>
 
 #include "plist/Dictionary.h"
 #include "plist/Key.h"
 #include "plist/KeyList.h"
+#include "plist/Value.h"
 #include "plist/ValueView.h"
 
 namespace tarn {
@@ -42,6 +44,16 @@ class TarnReportingMessageFields {
     std::transform(
         later.values_.begin(), later.values_.end(), values_.begin(), values_.begin(),
         [](const plist::ValueView& theirs, const plist::ValueView& own) { return theirs.present() ? theirs : own; });
+  }
+
+  // Copies the values and looks at the copies from now on; what they lay in may go.
+  using Kept = std::array<plist::Value, kCount>;
+  void keepIn(Kept& kept) {
+    for (std::size_t field = 0; field < kCount; ++field) {
+      plist::Value copy(values_[field]);  // the old value may lie in its own place
+      kept[field] = std::move(copy);
+      values_[field] = kept[field].view();
+    }
   }
 
  private:

@@ -28,7 +28,7 @@
 #include "derived/TarnReportingMessageFields.h"
 #include "derived/TarnReportingSegments.h"
 #include "service/vocabulary/TarnReportingLog.h"
-#include "session/TarnReportingSessionMessage.h"
+#include "session/TarnReportingSessionMessageList.h"
 #include "session/TarnReportingSessionPreviousValues.h"
 
 namespace tarn {
@@ -81,7 +81,13 @@ class TarnReportingSegmentWalk {
     state_.merge(message);
   }
 
-  TarnReportingSessionMessages finish() {
+  // What was taken so far may go.
+  void keep() {
+    state_.keepIn(kept_);
+    clock_.keep();
+  }
+
+  TarnReportingSessionMessageList finish() {
     TarnReportingNumberMessages(derived_);
     return std::move(derived_);
   }
@@ -95,7 +101,7 @@ class TarnReportingSegmentWalk {
     const bool isTold =
         time.present() && clock_.started() && seconds > minimumSeconds_ && rules_.suffices(state_) && !process_.empty();
     if (isTold) {
-      derived_.push_back(rules_.makeMessage({state_, process_, seconds, derived_.size() + 1}));
+      derived_.append(rules_.makeMessage({state_, process_, seconds, derived_.size() + 1}));
     }
     Rules::kLog(LogLevel::Debug, isTold ? Rules::kAdded : Rules::kSkipped, Rules::kOperation, derived_.size());
     clock_.startAt(time);
@@ -106,9 +112,10 @@ class TarnReportingSegmentWalk {
   Rules rules_;
   TarnReportingMessageFieldReader<Field> reader_{Rules::keys()};
   Fields state_;
+  typename Fields::Kept kept_;
   bool running_ = false;
   TarnReportingSegmentClock clock_;
-  TarnReportingSessionMessages derived_;
+  TarnReportingSessionMessageList derived_;
 };
 
 }  // namespace tarn

@@ -51,9 +51,11 @@ std::string TarnReportingVolumeLabel(double volume) {
       .value_or(std::string());
 }
 
-void TarnReportingNumberMessages(const TarnReportingSessionMessages& derived) {
-  for (const auto& message : derived) {
-    message->mutableMessage().set(kMessageCount, derived.size());
+void TarnReportingNumberMessages(const TarnReportingSessionMessageList& derived) {
+  for (std::size_t index = 0; index < derived.size(); ++index) {
+    derived.change(index, [&](TarnReportingSessionMessage& message) {
+      message.mutableMessage().set(kMessageCount, derived.size());
+    });
   }
 }
 

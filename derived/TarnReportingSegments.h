@@ -6,20 +6,28 @@
 
 #include <span>
 #include <string>
+#include <utility>
 
 #include "plist/Key.h"
+#include "plist/Value.h"
 #include "plist/ValueView.h"
-#include "session/TarnReportingSessionMessage.h"
+#include "session/TarnReportingSessionMessageList.h"
 
 namespace tarn {
 
 // The beginning of the segment that runs, if one does. The time stamp is kept as the message has it, for the log; it
-// lies in that message's payload.
+// lies in that message's payload until keep().
 class TarnReportingSegmentClock {
  public:
   // An absent time stamp leaves no beginning.
   void startAt(const plist::ValueView& time) noexcept { start_ = time; }
   void clear() noexcept { start_ = {}; }
+  // Copies the time stamp; what it lay in may go.
+  void keep() {
+    plist::Value copy(start_);
+    kept_ = std::move(copy);
+    start_ = kept_.view();
+  }
 
   bool started() const noexcept { return start_.present(); }
   const plist::ValueView& start() const noexcept { return start_; }
@@ -28,6 +36,7 @@ class TarnReportingSegmentClock {
 
  private:
   plist::ValueView start_;
+  plist::Value kept_;
 };
 
 // Comparisons of values that should be numbers or texts; values of other kinds are read as such.
@@ -44,6 +53,6 @@ std::string TarnReportingVolumeLabel(double volume);
 // The index of a message among the derived ones, from 1, and how many there are.
 extern const plist::Key kTarnReportingMessageIndex;
 // Tells each of the derived messages how many they are.
-void TarnReportingNumberMessages(const TarnReportingSessionMessages& derived);
+void TarnReportingNumberMessages(const TarnReportingSessionMessageList& derived);
 
 }  // namespace tarn

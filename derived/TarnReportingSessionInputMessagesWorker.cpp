@@ -132,13 +132,13 @@ std::string InputRules::joinedCodecs() const {
 
 }  // namespace
 
-TarnReportingSessionMessages TarnReportingSessionInputMessagesWorker::createInputMessages(
-    const TarnReportingSessionMessages& messages, const TarnReportingSessionPreviousValues& previousValues,
+TarnReportingSessionMessageList TarnReportingSessionInputMessagesWorker::createInputMessages(
+    const TarnReportingSessionMessageList& messages, const TarnReportingSessionPreviousValues& previousValues,
     std::string_view process, double minimumRunningtime) {
   InputRules::kLog(LogLevel::Debug, "entering createInputMessages %s", InputRules::kOperation);
-  const TarnReportingSessionMessages combined =
+  const TarnReportingCombinedMessages combined =
       TarnReportingSessionWorkerUtility::combineRapidMessages(messages, kKeysToCombine, kMaximumPauseSeconds);
-  TarnReportingSessionMessages derived = TarnReportingDerivedMessages(
+  TarnReportingSessionMessageList derived = TarnReportingDerivedMessages(
       combined, TarnReportingSegmentWalk<InputRules>(previousValues, process, minimumRunningtime));
   InputRules::kLog(LogLevel::Debug, "returning input messages { func=%s, action=return, count=%lu }",
                    InputRules::kOperation, derived.size());

@@ -8,7 +8,7 @@
 #include <memory>
 #include <string_view>
 
-#include "session/TarnReportingSessionMessage.h"
+#include "session/TarnReportingSessionMessageList.h"
 #include "session/TarnReportingSessionPreviousValues.h"
 #include "session/TarnReportingSessionWorker.h"
 
@@ -31,9 +31,9 @@ class TarnReportingSessionInputMessagesWorker : public TarnReportingSessionWorke
   // has; under the others they are already the last of these. `process`: the application's name; nothing comes out
   // when it is empty. Segments of `minimumRunningtime` seconds or less are left out; the codecs seen in them count for
   // the next message. Bursts of the spatial settings are folded into one message, in place.
-  static TarnReportingSessionMessages createInputMessages(const TarnReportingSessionMessages& messages,
-                                                          const TarnReportingSessionPreviousValues& previousValues,
-                                                          std::string_view process, double minimumRunningtime);
+  static TarnReportingSessionMessageList createInputMessages(const TarnReportingSessionMessageList& messages,
+                                                             const TarnReportingSessionPreviousValues& previousValues,
+                                                             std::string_view process, double minimumRunningtime);
 };
 
 }  // namespace tarn

@@ -58,7 +58,8 @@ class LagoonWalk {
  public:
   LagoonWalk(const TarnReportingSessionPreviousValues& previousValues, double minimumPlaytime);
   void take(const plist::Dictionary& payload);
-  TarnReportingSessionMessages finish();
+  void keep();
+  TarnReportingSessionMessageList finish();
 
  private:
   void endSegment(const plist::ValueView& time);
@@ -68,10 +69,11 @@ class LagoonWalk {
   const Fields defaults_ = defaultValues();
   TarnReportingMessageFieldReader<Field> reader_{kKeys};
   Fields state_;
+  Fields::Kept kept_;
   bool running_;
   bool inGroup_;
   TarnReportingSegmentClock clock_;
-  TarnReportingSessionMessages derived_;
+  TarnReportingSessionMessageList derived_;
 };
 
 LagoonWalk::LagoonWalk(const TarnReportingSessionPreviousValues& previousValues, double minimumPlaytime)
@@ -117,7 +119,7 @@ void LagoonWalk::endSegment(const plist::ValueView& time) {
        "startTarnTimestamp=%@, startTarnTimestamp_double=%f }",
        kOperation, seconds, time, time.asDouble(), clock_.start(), clock_.start().asDouble());
   if (seconds > minimumPlaytime_ && isInGroup(state_[Field::GroupSession])) {
-    derived_.push_back(makeMessage(seconds));
+    derived_.append(makeMessage(seconds));
     kLog(LogLevel::Debug, "added lagoon message { func=%s, action=add, count=%lu }", kOperation, derived_.size());
   } else {
     kLog(LogLevel::Debug,
@@ -151,7 +153,12 @@ std::shared_ptr<TarnReportingSessionMessage> LagoonWalk::makeMessage(double seco
   return message;
 }
 
-TarnReportingSessionMessages LagoonWalk::finish() {
+void LagoonWalk::keep() {
+  state_.keepIn(kept_);
+  clock_.keep();
+}
+
+TarnReportingSessionMessageList LagoonWalk::finish() {
   TarnReportingNumberMessages(derived_);
   return std::move(derived_);
 }
@@ -192,8 +199,8 @@ plist::ValueView TarnReportingSessionLagoonMessagesWorker::coalesceKey(
   return {};
 }
 
-TarnReportingSessionMessages TarnReportingSessionLagoonMessagesWorker::createLagoonMessages(
-    const TarnReportingSessionMessages& messages, const TarnReportingSessionPreviousValues& previousValues,
+TarnReportingSessionMessageList TarnReportingSessionLagoonMessagesWorker::createLagoonMessages(
+    const TarnReportingSessionMessageList& messages, const TarnReportingSessionPreviousValues& previousValues,
     double minimumPlaytime) {
   kLog(LogLevel::Debug, "entering createLagoonMessages %s", kOperation);
   return TarnReportingDerivedMessages(messages, LagoonWalk(previousValues, minimumPlaytime));

@@ -12,7 +12,7 @@
 
 #include "derived/TarnReportingMessageFields.h"
 #include "plist/ValueView.h"
-#include "session/TarnReportingSessionMessage.h"
+#include "session/TarnReportingSessionMessageList.h"
 #include "session/TarnReportingSessionPreviousValues.h"
 #include "session/TarnReportingSessionWorker.h"
 
@@ -34,9 +34,9 @@ class TarnReportingSessionLagoonMessagesWorker : public TarnReportingSessionWork
   // the walk starts. At a stop they are the session's, so they are older than the first message only under keys that
   // none of these messages has; under the others they are already the last of these: output that they say still runs
   // counts from the last time stamp. Segments of `minimumPlaytime` seconds or less are left out.
-  static TarnReportingSessionMessages createLagoonMessages(const TarnReportingSessionMessages& messages,
-                                                           const TarnReportingSessionPreviousValues& previousValues,
-                                                           double minimumPlaytime);
+  static TarnReportingSessionMessageList createLagoonMessages(const TarnReportingSessionMessageList& messages,
+                                                              const TarnReportingSessionPreviousValues& previousValues,
+                                                              double minimumPlaytime);
 
   // The values of a message, or of the running state, that the walk looks at.
   enum class Field : std::size_t {

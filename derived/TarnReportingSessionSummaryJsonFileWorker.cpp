@@ -95,12 +95,13 @@ void TarnReportingSessionSummaryJsonFileWorker::writeMessages(const TarnReportin
   Counts counts;
   std::string lines;
   bool isFirst = true;
-  for (const auto& message : session.messages()) {
-    if (message->isRedundant()) continue;
+  const TarnReportingSessionMessageList& messages = session.messages();
+  for (auto at = messages.begin(); at != messages.end(); ++at) {
+    if ((*at)->isRedundant()) continue;
     if (reportPath_.empty() && !openFile(session)) return;
-    markSessionStarted(*message);
+    messages.change(at.index(), markSessionStarted);
     lines = isFirst ? "" : ",\n";
-    if (!appendObject(lines, *message, counts)) continue;
+    if (!appendObject(lines, **at, counts)) continue;
     if (!writeLine(lines)) return;
     isFirst = false;
   }

@@ -130,11 +130,11 @@ std::shared_ptr<TarnReportingSessionMessage> VolumeRules::makeMessage(const Tarn
 
 }  // namespace
 
-TarnReportingSessionMessages TarnReportingSessionVolumeMessagesWorker::createVolumeMessages(
-    const TarnReportingSessionMessages& messages, const TarnReportingSessionPreviousValues& previousValues,
+TarnReportingSessionMessageList TarnReportingSessionVolumeMessagesWorker::createVolumeMessages(
+    const TarnReportingSessionMessageList& messages, const TarnReportingSessionPreviousValues& previousValues,
     std::string_view process, double minimumPlaytime) {
   VolumeRules::kLog(LogLevel::Debug, "entering createVolumeMessages %s", VolumeRules::kOperation);
-  const TarnReportingSessionMessages combined =
+  const TarnReportingCombinedMessages combined =
       TarnReportingSessionWorkerUtility::combineRapidMessages(messages, kKeysToCombine, kMaximumPauseSeconds);
   return TarnReportingDerivedMessages(combined,
                                       TarnReportingSegmentWalk<VolumeRules>(previousValues, process, minimumPlaytime));

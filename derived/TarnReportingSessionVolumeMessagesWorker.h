@@ -8,7 +8,7 @@
 #include <memory>
 #include <string_view>
 
-#include "session/TarnReportingSessionMessage.h"
+#include "session/TarnReportingSessionMessageList.h"
 #include "session/TarnReportingSessionPreviousValues.h"
 #include "session/TarnReportingSessionWorker.h"
 
@@ -31,9 +31,9 @@ class TarnReportingSessionVolumeMessagesWorker : public TarnReportingSessionWork
   // has; under the others they are already the last of these. `process`: the application's name; nothing comes out
   // when it is empty. Segments of `minimumPlaytime` seconds or less are left out. Bursts of the spatial settings are
   // folded into one message, in place.
-  static TarnReportingSessionMessages createVolumeMessages(const TarnReportingSessionMessages& messages,
-                                                           const TarnReportingSessionPreviousValues& previousValues,
-                                                           std::string_view process, double minimumPlaytime);
+  static TarnReportingSessionMessageList createVolumeMessages(const TarnReportingSessionMessageList& messages,
+                                                              const TarnReportingSessionPreviousValues& previousValues,
+                                                              std::string_view process, double minimumPlaytime);
 };
 
 }  // namespace tarn

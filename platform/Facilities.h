@@ -21,6 +21,7 @@ class GyreService;
 class LocalCalendar;
 class Log;
 class NotificationCenter;
+class OverflowStore;
 class PerfDataWriters;
 class PerformanceTraceService;
 class ProcessControl;
@@ -67,7 +68,8 @@ struct Facilities {
   TraceAnalysis* traceAnalysis = nullptr;
   PerfDataWriters* perfDataWriters = nullptr;
   AccessoryQueries* accessories = nullptr;
-  Signposts* signposts = nullptr;  // null: nothing ever records
+  Signposts* signposts = nullptr;     // null: nothing ever records
+  OverflowStore* overflow = nullptr;  // null: what is beyond the memory's bound stays there
 };
 
 }  // namespace tarn::platform

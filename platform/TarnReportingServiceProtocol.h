@@ -61,6 +61,7 @@ class TarnReportingServiceProtocol {
 
   // No remote operations: what the client has now, for whoever bounds that. Threads: the server queue's.
   virtual std::size_t sessionCount() const { return 0; }
+  virtual std::size_t logBytes() const { return 0; }  // memory that the messages of its sessions take
   virtual bool hasSession(std::int64_t reporterID) const {
     static_cast<void>(reporterID);
     return false;

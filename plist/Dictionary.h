@@ -54,6 +54,8 @@ class Array {
   friend class ValueView;
   friend class PackedBuilder;
   friend class Packed;
+  friend class PackedImageReader;
+  friend class PackedImageWriter;
   explicit Array(detail::Body* body) noexcept : body_(body) {}
   detail::Body* body_;
 };
@@ -128,6 +130,8 @@ class Dictionary {
   friend class ValueView;
   friend class PackedBuilder;
   friend class Packed;
+  friend class PackedImageReader;
+  friend class PackedImageWriter;
   explicit Dictionary(detail::Body* body) noexcept : body_(body) {}
   detail::Body* body_;
 };

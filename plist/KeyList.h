@@ -60,6 +60,7 @@ class KeyList {
  private:
   friend class Dictionary;
   friend class PackedBuilder;
+  friend class PackedImageReader;
   explicit KeyList(detail::KeyListBody* body) noexcept : body_(body) {}
   // Whether any key starts with `prefix`.
   static bool hasPrefix(const detail::KeyListBody& body, std::string_view prefix) noexcept;

@@ -204,6 +204,7 @@ std::shared_ptr<TarnReportingSession> TarnReportingClientServerInstance::findRep
 std::shared_ptr<TarnReportingSession> TarnReportingClientServerInstance::makeSession(std::int64_t reporterID) {
   auto session = TarnReportingSession::initWithID(reporterID, {processIdentifier_});
   session->setClientProcessName(clientProcessName_);
+  session->setLogAccount(logAccount_);
   return session;
 }
 

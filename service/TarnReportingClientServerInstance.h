@@ -12,6 +12,7 @@
 
 #include "platform/TarnReportingServiceProtocol.h"
 #include "service/TarnReportingSessionMap.h"
+#include "session/TarnReportingSessionLogMemory.h"
 
 namespace tarn {
 
@@ -41,6 +42,7 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
   void getAllReporters(platform::Reply<std::vector<std::int64_t>> reply) override;
   void killService() override;
   std::size_t sessionCount() const override { return sessions_.size(); }
+  std::size_t logBytes() const override { return logAccount_->bytes; }
   bool hasSession(std::int64_t reporterID) const override { return sessions_.find(reporterID) != nullptr; }
 
   // Ends the client: on the server queue, stops its started sessions, drops all of them and leaves the service's list.
@@ -85,6 +87,8 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
   std::optional<double> clientStartDate_;
   std::string clientProcessName_;
   TarnReportingSessionMap sessions_;
+  const std::shared_ptr<TarnReportingSessionLogAccount> logAccount_ =
+      std::make_shared<TarnReportingSessionLogAccount>();
   bool endTold_ = false;
 };
 

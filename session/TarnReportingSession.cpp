@@ -71,7 +71,8 @@ TarnReportingSession::TarnReportingSession(std::int64_t reporterID, std::vector<
     : reporterID_(reporterID),
       processIdentifiers_(std::move(processIdentifiers)),
       mode_(mode),
-      serviceName_(TarnReportingUtilityGenerateServiceNameFromServiceType(serviceType_)) {}
+      serviceName_(TarnReportingUtilityGenerateServiceNameFromServiceType(serviceType_)),
+      log_(reporterID) {}
 
 TarnReportingSession::~TarnReportingSession() {
   kLog(LogLevel::Info, "deallocing this session %lli", reporterID_);

@@ -82,7 +82,9 @@ class TarnReportingSession : public std::enable_shared_from_this<TarnReportingSe
   const std::string& clientProcessName() const noexcept { return clientProcessName_; }
   const std::vector<std::int32_t>& processIdentifiers() const noexcept { return processIdentifiers_; }
   // The log: what came and was not redundant since start, and the markers of start and stop.
-  const TarnReportingSessionMessages& messages() const noexcept { return log_.messages(); }
+  const TarnReportingSessionMessageList& messages() const noexcept { return log_.messages(); }
+  // Where the memory of the log is counted for the session's owner.
+  void setLogAccount(std::shared_ptr<TarnReportingSessionLogAccount> account) { log_.setAccount(std::move(account)); }
   const TarnReportingSessionPreviousValues& previousValues() const noexcept { return previousValues_; }
   TarnReportingSessionPreviousValues& previousValues() noexcept { return previousValues_; }
   // Messages received since the last stop, redundant ones included.

@@ -13,11 +13,6 @@ namespace {
 
 constexpr TarnReportingLogger kLog{TarnReportingSessionCategory, "TarnReportingSessionMessage"};
 
-double sortingTime(const TarnReportingSessionMessage& message) {
-  const double time = message.message().get(keys::kTimestamp).asDouble();
-  return std::isnan(time) ? 0 : time;  // a stamp that is no number would leave no order at all
-}
-
 }  // namespace
 
 const TarnReportingSessionMessage::DestinationWorkers& TarnReportingSessionMessage::destinationWorkers()
@@ -46,12 +41,17 @@ std::shared_ptr<TarnReportingSessionMessage> TarnReportingSessionMessage::copyWi
   return copy;
 }
 
+double TarnReportingSessionMessage::sortingTime() const noexcept {
+  const double time = message_.get(keys::kTimestamp).asDouble();
+  return std::isnan(time) ? 0 : time;  // a stamp that is no number would leave no order at all
+}
+
 void TarnReportingSessionMessage::sortMessages(TarnReportingSessionMessages& messages) {
   // Clients nearly always send in time order: look before doing anything, and read each stamp once.
   std::vector<double> times;
   times.reserve(messages.size());
   for (const auto& message : messages) {
-    times.push_back(sortingTime(*message));
+    times.push_back(message->sortingTime());
   }
   if (std::is_sorted(times.begin(), times.end())) return;
   std::vector<std::uint32_t> order(messages.size());

@@ -57,6 +57,8 @@ class TARN_CAPABILITY TarnReportingSessionMessage {
   // copy is addressed to everyone until someone addresses it.
   std::shared_ptr<TarnReportingSessionMessage> copyWithZone() const;
 
+  // What records are sorted by: the time stamp, 0 when it is missing or no number.
+  double sortingTime() const noexcept;
   // Sorts in place and stably by epoch time; records without a time stamp count as 0.
   static void sortMessages(TarnReportingSessionMessages& messages);
 

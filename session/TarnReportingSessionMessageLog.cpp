@@ -1,5 +1,7 @@
 #include "session/TarnReportingSessionMessageLog.h"
 
+#include <utility>
+
 namespace tarn {
 
 namespace {
@@ -11,26 +13,63 @@ std::uint64_t keyOf(AudioEventCategory category, AudioEventType type) {
 }  // namespace
 
 void TarnReportingSessionMessageLog::append(Record record) {
-  newest_[keyOf(record->category(), record->type())] = record.get();
-  messages_.push_back(std::move(record));
+  Newest& newest = newest_[keyOf(record->category(), record->type())];
+  const std::size_t index = messages_.size();
+  const TarnReportingSessionMessage* const recent = record.get();
+  messages_.append(std::move(record));
+  note(newest, index, recent);
+}
+
+void TarnReportingSessionMessageLog::note(Newest& newest, std::size_t index,
+                                          const TarnReportingSessionMessage* recent) noexcept {
+  newest.index = index;
+  newest.recent = recent;
+  if (newest.kept) [[unlikely]] {
+    newest.kept.reset();
+    --kept_;
+  }
 }
 
 void TarnReportingSessionMessageLog::sort() {
-  TarnReportingSessionMessage::sortMessages(messages_);
-  for (const Record& record : messages_) {
-    newest_[keyOf(record->category(), record->type())] = record.get();
+  if (!messages_.sort()) return;
+  forgetKept();
+  for (auto at = messages_.begin(); at != messages_.end(); ++at) {
+    note(newest_[keyOf((*at)->category(), (*at)->type())], at.index(), at->get());
   }
 }
 
 void TarnReportingSessionMessageLog::clear() {
-  messages_ = TarnReportingSessionMessages();  // gives the memory back too
+  messages_.clear();
   newest_.clear();
+  looked_.reset();
+  kept_ = 0;
 }
 
 const TarnReportingSessionMessage* TarnReportingSessionMessageLog::newest(AudioEventCategory category,
                                                                           AudioEventType type) const {
   const auto found = newest_.find(keyOf(category, type));
-  return found == newest_.end() ? nullptr : found->second;
+  if (found == newest_.end()) return nullptr;
+  Newest& newest = found->second;
+  if (newest.index >= messages_.overflowed()) return newest.recent;
+  // A producer may have changed what was read back.
+  if (changesSeen_ != messages_.changes()) {
+    changesSeen_ = messages_.changes();
+    forgetKept();
+  }
+  if (newest.kept) return newest.kept.get();
+  looked_ = messages_[newest.index];
+  if (kept_ < kMostKept && looked_) {
+    newest.kept = looked_;
+    ++kept_;
+  }
+  return looked_.get();
+}
+
+void TarnReportingSessionMessageLog::forgetKept() const {
+  if (std::exchange(kept_, 0) == 0) return;
+  for (auto& [key, newest] : newest_) {
+    newest.kept.reset();
+  }
 }
 
 }  // namespace tarn

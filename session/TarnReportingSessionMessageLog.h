@@ -5,6 +5,9 @@
 // keeps the answer of that walk for every pair of category and type, so that a look-up costs the same in a long session
 // as in a short one. A sort changes what the walk would find: the answers are then computed again in one pass.
 //
+// A record that went to the overflow store is read back when it is looked up. Of a bounded number of kinds it is kept
+// then; a client that has thousands of kinds pays with a read for each of its messages, and not with memory.
+//
 // Owner: the session. Threads: the server queue.
 #pragma once
 
@@ -13,28 +16,45 @@
 #include <memory>
 #include <unordered_map>
 
-#include "session/TarnReportingSessionMessage.h"
+#include "session/TarnReportingSessionMessageList.h"
 
 namespace tarn {
 
 class TarnReportingSessionMessageLog {
  public:
-  using Record = std::shared_ptr<TarnReportingSessionMessage>;
+  using Record = TarnReportingSessionMessageList::Record;
 
+  explicit TarnReportingSessionMessageLog(std::int64_t reporterID) : messages_(reporterID) {}
+
+  void setAccount(std::shared_ptr<TarnReportingSessionLogAccount> account) { messages_.setAccount(std::move(account)); }
   void append(Record record);
   // Sorts by time stamp (TarnReportingSessionMessage::sortMessages).
   void sort();
   void clear();
 
-  // The record nearest to the end of the log, as it now stands, of this category and type; null when there is none.
+  // The record nearest to the end of the log, as it now stands, of this category and type; null when there is none. It
+  // holds until the next look-up.
   const TarnReportingSessionMessage* newest(AudioEventCategory category, AudioEventType type) const;
 
-  const TarnReportingSessionMessages& messages() const noexcept { return messages_; }
+  const TarnReportingSessionMessageList& messages() const noexcept { return messages_; }
   std::size_t size() const noexcept { return messages_.size(); }
 
  private:
-  TarnReportingSessionMessages messages_;
-  std::unordered_map<std::uint64_t, const TarnReportingSessionMessage*> newest_;
+  struct Newest {
+    std::size_t index = 0;
+    const TarnReportingSessionMessage* recent = nullptr;  // while the log itself has it in memory
+    Record kept;                                          // else, when it was read back
+  };
+  static constexpr std::size_t kMostKept = 256;
+
+  void note(Newest& newest, std::size_t index, const TarnReportingSessionMessage* recent) noexcept;
+  void forgetKept() const;
+
+  TarnReportingSessionMessageList messages_;
+  mutable std::unordered_map<std::uint64_t, Newest> newest_;
+  mutable std::size_t kept_ = 0;
+  mutable std::uint64_t changesSeen_ = 0;  // of the records that are kept here
+  mutable Record looked_;
 };
 
 }  // namespace tarn

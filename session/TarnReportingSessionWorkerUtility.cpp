@@ -11,41 +11,47 @@ namespace {
 
 constexpr std::string_view kInvalidCoordinates = "plac_invalid_";
 
-double timeOf(const TarnReportingSessionMessage& message) {
-  return message.message().get(keys::kTimestamp).asDouble();
-}
-
 }  // namespace
 
-TarnReportingSessionMessages TarnReportingSessionWorkerUtility::combineRapidMessages(
-    const TarnReportingSessionMessages& messages, std::span<const plist::Key> keysToCombine, double maximumPausetime) {
-  TarnReportingSessionMessages result;
+TarnReportingCombinedMessages TarnReportingSessionWorkerUtility::combineRapidMessages(
+    const TarnReportingSessionMessageList& messages, std::span<const plist::Key> keysToCombine,
+    double maximumPausetime) {
+  TarnReportingCombinedMessages combined(messages);
   std::vector<bool> seen(keysToCombine.size());
-  TarnReportingSessionMessage* head = nullptr;
-  for (const auto& message : messages) {
+  bool hasHead = false;
+  std::size_t head = 0;
+  double headTime = 0;
+  for (auto at = messages.begin(); at != messages.end(); ++at) {
+    const std::shared_ptr<TarnReportingSessionMessage>& message = *at;
+    const plist::Dictionary& payload = message->message();
     const auto key = std::find_if(keysToCombine.begin(), keysToCombine.end(),
-                                  [&](const plist::Key& each) { return message->message().contains(each); });
-    if (key == keysToCombine.end()) {
-      result.push_back(message);
-      continue;
-    }
+                                  [&](const plist::Key& each) { return payload.contains(each); });
+    if (key == keysToCombine.end()) continue;
     const auto place = static_cast<std::size_t>(key - keysToCombine.begin());
     if (seen[place]) {
       seen.assign(seen.size(), false);
-      head = nullptr;
+      hasHead = false;
     }
     seen[place] = true;
-    if (head != nullptr && timeOf(*message) - timeOf(*head) < maximumPausetime) {
-      const MutexLock guard(*head);
-      head->mutableMessage().merge(message->message());
+    const plist::ValueView time = payload.get(keys::kTimestamp);
+    if (hasHead && time.asDouble() - headTime < maximumPausetime) {
+      // Its own count: the page that it lies in may go when the head's is read.
+      const plist::Dictionary merged = payload;
+      headTime = time.present() ? time.asDouble() : headTime;
+      messages.change(head, [&](TarnReportingSessionMessage& record) {
+        const MutexLock guard(record);
+        record.mutableMessage().merge(merged);
+      });
+      combined.setMerged(at.index());
       continue;
     }
-    if (head == nullptr) {
-      head = message.get();
+    if (!hasHead) {
+      hasHead = true;
+      head = at.index();
+      headTime = time.asDouble();
     }
-    result.push_back(message);
   }
-  return result;
+  return combined;
 }
 
 bool TarnReportingSessionWorkerUtility::isParleyXYerrorMessage(const TarnReportingSessionMessage& message) {

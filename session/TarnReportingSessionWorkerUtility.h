@@ -3,12 +3,29 @@
 // Threads: the server queue.
 #pragma once
 
+#include <cstddef>
 #include <span>
+#include <vector>
 
 #include "plist/Key.h"
-#include "session/TarnReportingSessionMessage.h"
+#include "session/TarnReportingSessionMessageList.h"
 
 namespace tarn {
+
+// A list of messages without some of them, which were merged into others; the list outlives it.
+class TarnReportingCombinedMessages {
+ public:
+  explicit TarnReportingCombinedMessages(const TarnReportingSessionMessageList& all) : all_(all), merged_(all.size()) {}
+
+  const TarnReportingSessionMessageList& all() const noexcept { return all_; }
+  // By its place in the list.
+  bool isMerged(std::size_t index) const { return merged_[index]; }
+  void setMerged(std::size_t index) { merged_[index] = true; }
+
+ private:
+  const TarnReportingSessionMessageList& all_;
+  std::vector<bool> merged_;  // so that an hour of messages takes no second list of them
+};
 
 class TarnReportingSessionWorkerUtility {
  public:
@@ -28,9 +45,9 @@ class TarnReportingSessionWorkerUtility {
   //
   // Returns the messages that are left, in their order: the same records, not copies. The payloads of the heads are
   // changed in place. `maximumPausetime` is in seconds.
-  static TarnReportingSessionMessages combineRapidMessages(const TarnReportingSessionMessages& messages,
-                                                           std::span<const plist::Key> keysToCombine,
-                                                           double maximumPausetime);
+  static TarnReportingCombinedMessages combineRapidMessages(const TarnReportingSessionMessageList& messages,
+                                                            std::span<const plist::Key> keysToCombine,
+                                                            double maximumPausetime);
 
   // Whether the message reports one of the video-call application's errors of invalid coordinates.
   static bool isParleyXYerrorMessage(const TarnReportingSessionMessage& message);

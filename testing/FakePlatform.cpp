@@ -32,7 +32,8 @@ FakePlatform::FakePlatform()
                   &traceAnalysis,
                   &perfDataWriters,
                   &accessories,
-                  &signposts} {
+                  &signposts,
+                  &overflow} {
   const auto record = [this](auto&... fakes) { (fakes.recordOrderIn(order), ...); };
   record(log, conditions, defaults, notifications, commandRunner, wattlog, pylon, snare, tattle, gyre, flume);
   TarnReportingInstallFacilities(&facilities_);

@@ -15,6 +15,7 @@
 #include "testing/FakeListener.h"
 #include "testing/FakeLocalCalendar.h"
 #include "testing/FakeNotificationCenter.h"
+#include "testing/FakeOverflowStore.h"
 #include "testing/FakeProcessControl.h"
 #include "testing/FakeProcessEnvironment.h"
 #include "testing/FakeProcessFacts.h"
@@ -84,6 +85,7 @@ class FakePlatform {
   FakePerfDataWriters perfDataWriters;
   FakeAccessoryQueries accessories;
   FakeSignposts signposts;
+  FakeOverflowStore overflow;
   FakeListener listener;
 
  private:

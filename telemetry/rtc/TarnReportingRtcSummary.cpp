@@ -1,7 +1,9 @@
 #include "telemetry/rtc/TarnReportingRtcSummary.h"
 
+#include <algorithm>
 #include <deque>
 #include <string>
+#include <string_view>
 #include <unordered_map>
 
 namespace tarn {
@@ -9,6 +11,7 @@ namespace tarn {
 namespace {
 
 const plist::Key kSummaryEvent("Tarn_Session_Summary_Event");
+constexpr std::string_view kWorker = "TarnReportingSessionRtcWorker";
 
 // The joined values of each key, keys in the order in which they were first seen.
 class Table {
@@ -50,22 +53,33 @@ class Table {
 
 }  // namespace
 
-TarnReportingRtcSummary TarnReportingMakeRtcSummary(
-    AudioServiceType serviceType, const std::vector<std::shared_ptr<TarnReportingSessionMessage>>& messages,
-    std::size_t longestText) {
+bool TarnReportingIsAddressedToRtc(const TarnReportingSessionMessage& message) {
+  const auto& destinations = message.destinationWorkers();
+  return destinations.empty() || std::find(destinations.begin(), destinations.end(), kWorker) != destinations.end();
+}
+
+TarnReportingRtcSummary TarnReportingMakeRtcSummary(AudioServiceType serviceType,
+                                                    const TarnReportingRtcMessages& stopped, std::size_t longestText) {
   TarnReportingRtcSummary summary;
   Table table;
   table.append(kSummaryEvent, static_cast<unsigned>(serviceType));
-  for (const auto& message : messages) {
-    if (message->isRedundant() || !message->isSessionStarted()) continue;
-    if (table.bytes() >= longestText) {
-      summary.complete = false;
-      break;
-    }
+  const auto take = [&](const std::shared_ptr<TarnReportingSessionMessage>& message) {
+    if (message->isRedundant() || !message->isSessionStarted()) return;
+    summary.complete = summary.complete && table.bytes() < longestText;
+    if (!summary.complete) return;
     for (const plist::Dictionary::Entry& entry : message->message()) {
       table.append(entry.key, entry.value);
     }
+  };
+  for (const auto& page : stopped.pages) {
+    if (!summary.complete) break;
+    for (const auto& message : page->read()) {
+      if (TarnReportingIsAddressedToRtc(*message)) {
+        take(message);
+      }
+    }
   }
+  std::for_each(stopped.messages.begin(), stopped.messages.end(), take);
   summary.payload = table.payload();
   return summary;
 }

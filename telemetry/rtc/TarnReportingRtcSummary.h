@@ -15,6 +15,7 @@
 #include "plist/Dictionary.h"
 #include "service/vocabulary/TarnReportingVocabulary.h"
 #include "session/TarnReportingSessionMessage.h"
+#include "session/TarnReportingSessionMessagePage.h"
 
 namespace tarn {
 
@@ -27,9 +28,19 @@ struct TarnReportingRtcSummary {
   bool complete = true;  // false: the limit was reached
 };
 
+// Whether the Rtc worker is among those that the message is for.
+bool TarnReportingIsAddressedToRtc(const TarnReportingSessionMessage& message);
+
+// The messages of a session that was stopped: those of the pages, of which not all need be for the worker, then the
+// others, which are. A page is read when its messages are added, one after the other.
+struct TarnReportingRtcMessages {
+  std::vector<std::shared_ptr<const TarnReportingSessionMessagePage>> pages;
+  std::vector<std::shared_ptr<TarnReportingSessionMessage>> messages;
+};
+
 // Redundant messages and those that came while the session was not started are left out.
-TarnReportingRtcSummary TarnReportingMakeRtcSummary(
-    AudioServiceType serviceType, const std::vector<std::shared_ptr<TarnReportingSessionMessage>>& messages,
-    std::size_t longestText = TarnReportingRtcSummary::kLongestText);
+TarnReportingRtcSummary TarnReportingMakeRtcSummary(AudioServiceType serviceType,
+                                                    const TarnReportingRtcMessages& stopped,
+                                                    std::size_t longestText = TarnReportingRtcSummary::kLongestText);
 
 }  // namespace tarn

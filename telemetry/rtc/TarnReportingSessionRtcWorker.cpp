@@ -1,6 +1,5 @@
 #include "telemetry/rtc/TarnReportingSessionRtcWorker.h"
 
-#include <algorithm>
 #include <chrono>
 #include <string>
 #include <utility>
@@ -18,20 +17,17 @@ constexpr std::string_view kServiceNameSuffix = "_session";
 // For which a stop waits at the most while another thread carries out the start, which asks for backends and no more.
 constexpr std::chrono::milliseconds kStartHelp{20};
 
-bool isAddressedToRtc(const TarnReportingSessionMessage& message) {
-  const auto& destinations = message.destinationWorkers();
-  return destinations.empty() || std::find(destinations.begin(), destinations.end(),
-                                           TarnReportingSessionRtcWorker::kClassName) != destinations.end();
-}
-
 // The destinations are read here: a copy is addressed to everyone.
 TarnReportingRtcMirror::Stopped snapshotOf(const TarnReportingSession& session) {
-  TarnReportingRtcMirror::Stopped stopped{{}, !session.messages().empty(), session.serviceType(), session.reporterID()};
-  stopped.messages.reserve(session.messages().size());
-  for (const auto& message : session.messages()) {
+  const TarnReportingSessionMessageList& log = session.messages();
+  TarnReportingRtcMirror::Stopped stopped{{}, !log.empty(), session.serviceType(), session.reporterID()};
+  stopped.messages.pages = log.pages();
+  std::vector<std::shared_ptr<TarnReportingSessionMessage>>& copies = stopped.messages.messages;
+  copies.reserve(log.recent().size());
+  for (const auto& message : log.recent()) {
     auto copy = message->copyWithZone();
-    if (isAddressedToRtc(*message)) {
-      stopped.messages.push_back(std::move(copy));
+    if (TarnReportingIsAddressedToRtc(*message)) {
+      copies.push_back(std::move(copy));
     }
   }
   return stopped;

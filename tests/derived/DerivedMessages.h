@@ -8,6 +8,7 @@
 
 #include "plist/Dictionary.h"
 #include "session/TarnReportingSessionMessage.h"
+#include "session/TarnReportingSessionMessageList.h"
 #include "session/TarnReportingSessionPreviousValues.h"
 #include "testing/FakePlatform.h"
 
@@ -36,9 +37,18 @@ inline TarnReportingSessionPreviousValues previous(const plist::Dictionary& valu
   return previousValues;
 }
 
+// A list as a session keeps it, of these records.
+inline TarnReportingSessionMessageList messageListOf(const TarnReportingSessionMessages& messages) {
+  TarnReportingSessionMessageList list;
+  for (const auto& message : messages) {
+    list.append(message);
+  }
+  return list;
+}
+
 // The values of these keys, a text for each message: "10 0.5 1"; "(null)" for a key that isn't there.
-inline std::vector<std::string> rows(const TarnReportingSessionMessages& messages,
-                                     const std::vector<std::string>& keys) {
+template <class Messages>
+std::vector<std::string> rows(const Messages& messages, const std::vector<std::string>& keys) {
   std::vector<std::string> texts;
   for (const auto& message : messages) {
     std::string row;

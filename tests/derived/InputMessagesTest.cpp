@@ -15,11 +15,11 @@ using namespace testing;
 
 class CreateInputMessages : public ::testing::Test {
  protected:
-  static TarnReportingSessionMessages create(const TarnReportingSessionMessages& messages,
-                                             const plist::Dictionary& previousValues = {},
-                                             std::string_view process = "phone") {
-    return TarnReportingSessionInputMessagesWorker::createInputMessages(messages, previous(previousValues), process,
-                                                                        0.5);
+  static TarnReportingSessionMessageList create(const TarnReportingSessionMessages& messages,
+                                                const plist::Dictionary& previousValues = {},
+                                                std::string_view process = "phone") {
+    return TarnReportingSessionInputMessagesWorker::createInputMessages(messageListOf(messages),
+                                                                        previous(previousValues), process, 0.5);
   }
   static std::shared_ptr<TarnReportingSessionMessage> start(double time, plist::Dictionary more = {}) {
     more.set("session_input_running", true);

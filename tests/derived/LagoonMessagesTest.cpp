@@ -15,11 +15,11 @@ using namespace testing;
 
 class CreateLagoonMessages : public ::testing::Test {
  protected:
-  static TarnReportingSessionMessages create(const TarnReportingSessionMessages& messages,
-                                             const plist::Dictionary& previousValues = {},
-                                             double minimumPlaytime = 0.5) {
-    return TarnReportingSessionLagoonMessagesWorker::createLagoonMessages(messages, previous(previousValues),
-                                                                          minimumPlaytime);
+  static TarnReportingSessionMessageList create(const TarnReportingSessionMessages& messages,
+                                                const plist::Dictionary& previousValues = {},
+                                                double minimumPlaytime = 0.5) {
+    return TarnReportingSessionLagoonMessagesWorker::createLagoonMessages(messageListOf(messages),
+                                                                          previous(previousValues), minimumPlaytime);
   }
   // Output starts inside a group session.
   static std::shared_ptr<TarnReportingSessionMessage> start(double time, plist::Dictionary more = {}) {

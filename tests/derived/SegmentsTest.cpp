@@ -120,7 +120,8 @@ TEST(Segments, ClockCountsFromItsStartAndAbsentTimesAsZero) {
 }
 
 TEST(Segments, NumberingTellsEachMessageHowManyTheyAre) {
-  const TarnReportingSessionMessages messages{at(0), at(1), at(2)};
+  const FakePlatform platform;
+  const TarnReportingSessionMessageList messages = messageListOf({at(0), at(1), at(2)});
   TarnReportingNumberMessages(messages);
   EXPECT_EQ(rows(messages, {"msgcnt"}), (Rows{"3", "3", "3"}));
 }

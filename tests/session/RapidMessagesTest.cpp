@@ -14,8 +14,19 @@ using namespace testing;
 
 const std::vector<plist::Key> kKeys{"A", "B", "C"};
 
-TarnReportingSessionMessages combine(const TarnReportingSessionMessages& messages, double pause = 5) {
-  return TarnReportingSessionWorkerUtility::combineRapidMessages(messages, kKeys, pause);
+// What is left of the messages.
+TarnReportingSessionMessages combine(const TarnReportingSessionMessages& messages, double pause = 5,
+                                     const std::vector<plist::Key>& keys = kKeys) {
+  const FakePlatform platform;
+  const TarnReportingSessionMessageList list = messageListOf(messages);
+  const auto combined = TarnReportingSessionWorkerUtility::combineRapidMessages(list, keys, pause);
+  TarnReportingSessionMessages left;
+  for (std::size_t index = 0; index < messages.size(); ++index) {
+    if (!combined.isMerged(index)) {
+      left.push_back(messages[index]);
+    }
+  }
+  return left;
 }
 
 const std::vector<std::string> kColumns{"A", "B", "C", "tarnreporting_timestamp"};
@@ -117,9 +128,7 @@ TEST(CombineRapidMessages, CopyOfAHeadsPayloadKeepsWhatItWas) {
 }
 
 TEST(CombineRapidMessages, WithoutKeysEverythingPassesThrough) {
-  EXPECT_EQ(
-      TarnReportingSessionWorkerUtility::combineRapidMessages({at(0, {{"A", 1}}), at(0, {{"B", 1}})}, {}, 5).size(),
-      2U);
+  EXPECT_EQ(combine({at(0, {{"A", 1}}), at(0, {{"B", 1}})}, 5, {}).size(), 2U);
 }
 
 TEST(IsParleyXYerrorMessage, AnyKeyWithThePrefixCounts) {

@@ -1,0 +1,159 @@
+#include "session/TarnReportingSessionMessagePage.h"
+
+#include <algorithm>
+#include <cstdint>
+#include <cstring>
+#include <string_view>
+#include <utility>
+
+#include "service/vocabulary/TarnReportingLog.h"
+
+namespace tarn {
+
+namespace {
+
+constexpr TarnReportingLogger kLog{TarnReportingSessionCategory, "TarnReportingSessionMessagePage"};
+
+constexpr std::uint8_t kRedundant = 1;
+constexpr std::uint8_t kSessionStarted = 2;
+
+// Sees what a disk did to the bytes.
+std::uint64_t checksum(std::string_view bytes) noexcept {
+  constexpr std::uint64_t kFactor = 0x9E3779B97F4A7C15U;
+  std::uint64_t sum = bytes.size();
+  for (std::size_t at = 0; at < bytes.size(); at += sizeof sum) {
+    std::uint64_t word = 0;
+    std::memcpy(&word, bytes.data() + at, std::min(sizeof word, bytes.size() - at));
+    sum = (sum ^ word) * kFactor;
+    sum ^= sum >> 29U;
+  }
+  return sum;
+}
+
+bool readRecord(plist::PackedImageReader& reader,
+                const std::vector<TarnReportingSessionMessage::DestinationWorkers>& destinations,
+                TarnReportingSessionMessagePage::Record& record) {
+  AudioEventCategory category{};
+  AudioEventType type{};
+  std::uint8_t flags = 0;
+  std::uint32_t destination = 0;
+  plist::Dictionary payload;
+  const bool isWhole = reader.readNumber(category) && reader.readNumber(type) && reader.readNumber(flags) &&
+                       reader.readNumber(destination) && destination <= destinations.size() && reader.read(payload);
+  if (!isWhole) return false;
+  record = std::make_shared<TarnReportingSessionMessage>(std::move(payload), category, type);
+  record->setIsRedundant((flags & kRedundant) != 0);
+  record->setIsSessionStarted((flags & kSessionStarted) != 0);
+  if (destination > 0) {
+    record->setDestinationWorkers(destinations[destination - 1]);
+  }
+  return true;
+}
+
+}  // namespace
+
+void TarnReportingSessionMessagePage::Maker::add(const TarnReportingSessionMessage& record) {
+  const double time = record.sortingTime();
+  isSorted_ = isSorted_ && (size_ == 0 || lastTime_ <= time);
+  firstTime_ = size_ == 0 ? time : firstTime_;
+  lastTime_ = time;
+  ++size_;
+  const int flags = (record.isRedundant() ? kRedundant : 0) | (record.isSessionStarted() ? kSessionStarted : 0);
+  writer_.writeNumber(record.category());
+  writer_.writeNumber(record.type());
+  writer_.writeNumber(static_cast<std::uint8_t>(flags));
+  writer_.writeNumber(static_cast<std::uint32_t>(numberOf(record.destinationWorkers())));
+  writer_.write(record.message());
+}
+
+// Messages go to few sets of workers, whose names are static texts: they needn't be written.
+std::size_t TarnReportingSessionMessagePage::Maker::numberOf(
+    const TarnReportingSessionMessage::DestinationWorkers& destinations) {
+  if (destinations.empty()) return 0;
+  const auto found = std::find(destinations_.begin(), destinations_.end(), destinations);
+  const auto number = static_cast<std::size_t>(found - destinations_.begin()) + 1;
+  if (found == destinations_.end()) {
+    destinations_.push_back(destinations);
+  }
+  return number;
+}
+
+Result<std::shared_ptr<const TarnReportingSessionMessagePage>> TarnReportingSessionMessagePage::Maker::finish(
+    platform::OverflowStore& store, const std::shared_ptr<Counts>& counts) {
+  if (!std::exchange(isSealed_, true)) {
+    writer_.writeNumber(checksum(image_));
+  }
+  Result<platform::OverflowStore::Place> written = store.write(image_);
+  if (written.failed()) return {nullptr, std::move(written.error)};
+  const std::size_t bytes = image_.size();
+  image_ = std::string();
+  const auto page = makePage(counts);
+  page->store_ = &store;
+  page->place_ = written.value;
+  page->storedBytes_ = bytes;
+  counts->bytesInStore += bytes;
+  return {page, {}};
+}
+
+std::shared_ptr<const TarnReportingSessionMessagePage> TarnReportingSessionMessagePage::Maker::finishInMemory(
+    const std::shared_ptr<Counts>& counts) {
+  return makePage(counts);
+}
+
+std::shared_ptr<TarnReportingSessionMessagePage> TarnReportingSessionMessagePage::Maker::makePage(
+    const std::shared_ptr<Counts>& counts) {
+  struct Constructible : TarnReportingSessionMessagePage {
+    Constructible() {}  // NOLINT(modernize-use-equals-default): reaches the private one
+  };
+  const std::shared_ptr<TarnReportingSessionMessagePage> page = std::make_shared<Constructible>();
+  page->counts_ = counts;
+  page->image_ = std::move(image_);
+  counts->bytesInMemory += page->image_.size();
+  page->destinations_ = std::move(destinations_);
+  page->size_ = size_;
+  page->firstTime_ = firstTime_;
+  page->lastTime_ = lastTime_;
+  page->isSorted_ = isSorted_;
+  return page;
+}
+
+TarnReportingSessionMessagePage::~TarnReportingSessionMessagePage() {
+  counts_->bytesInMemory -= image_.size();
+  if (store_ == nullptr) return;
+  store_->remove(place_);
+  counts_->bytesInStore -= storedBytes_;
+}
+
+std::vector<TarnReportingSessionMessagePage::Record> TarnReportingSessionMessagePage::read() const {
+  Result<std::vector<Record>> records = tryToRead();
+  if (records.failed()) {
+    records = tryToRead();  // a fault may have been the moment's
+  }
+  if (records.failed()) {
+    counts_->recordsLost += size_;
+    kLog(LogLevel::Error, "%lu messages of a log can't be read back: %@", size_, records.error->text);
+  }
+  return std::move(records.value);
+}
+
+Result<std::vector<TarnReportingSessionMessagePage::Record>> TarnReportingSessionMessagePage::tryToRead() const {
+  Result<std::string> stored;
+  if (store_ != nullptr) {
+    stored = store_->read(place_);
+    if (stored.failed()) return {{}, std::move(stored.error)};
+  }
+  std::string_view image = store_ != nullptr ? std::string_view(stored.value) : std::string_view(image_);
+  std::uint64_t expected = 0;
+  if (image.size() < sizeof expected) return {{}, Error{0, "the page is cut"}};
+  std::memcpy(&expected, image.data() + image.size() - sizeof expected, sizeof expected);
+  image.remove_suffix(sizeof expected);
+  if (checksum(image) != expected) return {{}, Error{0, "the page is damaged"}};
+  plist::PackedImageReader reader(image);
+  std::vector<Record> records(size_);
+  for (Record& record : records) {
+    if (!readRecord(reader, destinations_, record)) return {{}, Error{0, "the page is damaged"}};
+  }
+  return {std::move(records), {}};
+}
+
+}  // namespace tarn
