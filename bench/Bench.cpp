@@ -25,6 +25,8 @@ constexpr Figure kFigures[] = {
     {"stream", &measureStream},
     {"gathered", &measureGathered},
     {"recorded", &measureRecorded},
+    {"fleet", &measureFleet},
+    {"visible", &measureVisible},
     {"post", &measurePost},
     {"decoding", &measureDecoding},
     {"memory", &measureMemory},

@@ -46,7 +46,7 @@ plist::Dictionary makeMessage(std::uint64_t content, std::uint64_t moment) {
           {"buffer_frame_count", 512},
           {"voice_processing", false},
           {"volume_scalar_value", volume(content)},
-          {"underrun_count", 70'000 + content},
+          {"underrun_count", kFirstCount + content},
           {"codec_name", "lossless"},
           {"session_token", "9f2c1d7e"}};
 }
@@ -74,7 +74,7 @@ void renumber(wire::Request& request, std::uint64_t number) {
   message.set(kSystemUptime, systemUptime(number));
   message.set(kProcessUptime, 20'000 + number);
   message.set(kVolume, volume(number));
-  message.set(kUnderruns, 70'000 + number);
+  message.set(kUnderruns, kFirstCount + number);
 }
 
 std::string makeFrame(std::uint64_t number) {

@@ -12,6 +12,9 @@
 
 namespace tarn::bench {
 
+// The member "underrun_count" is the number of the message on top of this.
+inline constexpr std::uint64_t kFirstCount = 70'000;
+
 inline constexpr std::size_t kMessageKeys = 12;
 inline constexpr std::int64_t kReporterID = 4711;
 

@@ -38,9 +38,10 @@ void ServiceProcess::writeConfiguration(const ServiceSetup& setup) const {
 }
 
 void ServiceProcess::start(const std::string& program) {
-  const std::string state = directory_.path() + "/state";
+  const std::string state = stateDirectory();
   const std::string configuration = directory_.path() + "/config.toml";
   const std::string socket = socketPath();
+  const std::string log = directory_.path() + "/log";
   id_ = ::fork();
   if (id_ < 0) {
     fail("can't start a process");
@@ -48,7 +49,7 @@ void ServiceProcess::start(const std::string& program) {
   if (id_ == 0) {
     ::prctl(PR_SET_PDEATHSIG, SIGTERM);
     ::execl(program.c_str(), program.c_str(), "--socket", socket.c_str(), "--state-dir", state.c_str(), "--config",
-            configuration.c_str(), "--log-level", "error", nullptr);
+            configuration.c_str(), "--log-level", "error", "--log-target", log.c_str(), nullptr);
     std::_Exit(127);
   }
 }

@@ -36,6 +36,7 @@ class ServiceProcess {
 
   pid_t id() const noexcept { return id_; }
   std::string socketPath() const { return directory_.path() + "/socket"; }
+  std::string stateDirectory() const { return directory_.path() + "/state"; }
 
  private:
   void writeConfiguration(const ServiceSetup& setup) const;

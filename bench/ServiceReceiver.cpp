@@ -55,6 +55,14 @@ void ServiceReceiver::roundTrip() {
   mustBeOk(client_->call(request_), "sending a message");
 }
 
+std::uint64_t ServiceReceiver::send() {
+  renumber(request_, ++number_);
+  if (client_->send(request_) != client::SendStatus::Sent) {
+    fail("the service went away");
+  }
+  return number_;
+}
+
 void ServiceReceiver::stream(std::size_t count, std::size_t outstanding) {
   replies_ = 0;
   failures_ = 0;

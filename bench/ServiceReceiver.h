@@ -19,11 +19,15 @@ class ServiceReceiver final : public Receiver {
   void roundTrip() override;
   void stream(std::size_t count, std::size_t outstanding) override;
   double processorSeconds() const override { return bench::processorSeconds(service_.id()); }
+  // Sends one message and waits for nothing; its number.
+  std::uint64_t send();
   // Stops the session and starts it again.
   void forget() override;
 
   // Waits until the recorder has committed all that it was handed; returns how many events that is so far.
   std::int64_t waitUntilCommitted();
+  client::ClientConnection& client() noexcept { return *client_; }
+  std::string stateDirectory() const { return service_.stateDirectory(); }
   double residentBytes() const { return bench::residentBytes(service_.id()); }
 
  private:

@@ -11,6 +11,8 @@ void measureRoundTrip(const Settings& settings, Table& table);
 void measureStream(const Settings& settings, Table& table);
 void measureGathered(const Settings& settings, Table& table);
 void measureRecorded(const Settings& settings, Table& table);
+void measureFleet(const Settings& settings, Table& table);
+void measureVisible(const Settings& settings, Table& table);
 void measurePost(const Settings& settings, Table& table);
 void measureDecoding(const Settings& settings, Table& table);
 void measureMemory(const Settings& settings, Table& table);

@@ -15,6 +15,7 @@
 #include <vector>
 
 #include "plist/Result.h"
+#include "recorder/store/ChangeWatch.h"
 #include "recorder/store/Connection.h"
 
 namespace tarn::recorder {
@@ -81,6 +82,7 @@ class EventReader {
 
   const std::filesystem::path file_;
   Connection connection_;
+  ChangeWatch watch_;
   Identity opened_;
   bool asItLies_ = false;             // opened without locks and log
   std::optional<Identity> lastRead_;  // the file of the last rows, nothing before the first ones
