@@ -69,14 +69,17 @@ TEST_F(ServiceReports, AnEngineThatKnowsNoKeyGetsItsVolumeSummary) {
   library_.openAll(socket());
   tarnreporting_reports reports = {};
   ASSERT_EQ(tarnreporting_reports_declare(library_.session_, &reports), TARNREPORTING_OK);
-  ASSERT_EQ(tarnreporting_report_output_running(library_.writer_, &reports, 0.5, "Speaker"), TARNREPORTING_OK);
-  std::this_thread::sleep_for(std::chrono::milliseconds(600));  // what is shorter isn't told
-  ASSERT_EQ(tarnreporting_report_output_stopped(library_.writer_, &reports), TARNREPORTING_OK);
+  const auto now =
+      std::chrono::duration_cast<std::chrono::nanoseconds>(std::chrono::system_clock::now().time_since_epoch());
+  const auto stamp = static_cast<std::uint64_t>(now.count());
+  ASSERT_EQ(tarnreporting_report_output_running_at(library_.writer_, &reports, stamp, 0.5, "Speaker"),
+            TARNREPORTING_OK);
+  ASSERT_EQ(tarnreporting_report_output_stopped_at(library_.writer_, &reports, stamp + 1250000000), TARNREPORTING_OK);
   ASSERT_EQ(tarnreporting_session_end(library_.session_), TARNREPORTING_OK);
   const json summary = eventsOnceThereAre(1, named("Volume.Summary")).at(0).payload;
   EXPECT_EQ(summary.at("KvSessionVolume"), 0.5);
   EXPECT_EQ(summary.at("active_devices"), "Speaker");
-  EXPECT_GE(summary.at("play_seconds"), 0.6);
+  EXPECT_NEAR(summary.at("play_seconds"), 1.25, 1e-3);
 }
 
 TEST_F(ServiceReports, FieldsOfAnyKeysArriveWithTheirValuesAndStamp) {

@@ -223,9 +223,9 @@ class Table(unittest.TestCase):
     def test_a_report_becomes_a_function_in_each_language(self):
         files = made(TABLE)
         self.assertIn("tarnreporting_report_volume_changed(", files["clients/c/include/tarnreporting_reports.h"])
-        self.assertIn("Result volumeChanged(Writer& writer, double volume)",
+        self.assertIn("Result volumeChanged(Writer& writer, double volume, ",
                       files["clients/cpp/include/tarnreporting_reports.hpp"])
-        self.assertIn("def volume_changed(self, volume: float) -> bool:",
+        self.assertIn("def volume_changed(self, volume: float, *, stamp: Optional[float] = None) -> bool:",
                       files["clients/python/tarnreporting/reports.py"])
 
     def test_names_are_cut_into_words(self):

@@ -19,8 +19,9 @@ C_TOP = f"""\
  *   tarnreporting_reports_declare(session, &reports);                          once
  *   tarnreporting_report_output_running(writer, &reports, 0.5, "Speaker");     in the audio thread
  *
- * Each posts one message as tarnreporting_post() does, with its promises and its results. A text that is null counts as
- * empty. The reports are gone with their session; each takes one of the client's shapes.
+ * Each posts one message as tarnreporting_post() does, with its promises and its results; those with _at post the time
+ * of the event, in nanoseconds since 1970 UTC (0: the time of the call). A text that is null counts as empty. The
+ * reports are gone with their session; each takes one of the client's shapes.
  *
  * {NOTE} */
 #pragma once
@@ -58,6 +59,15 @@ static inline tarnreporting_value tarnreporting_report_hertz(uint32_t rate, char
   return tarnreporting_text(room, digits + 2);
 }
 """
+C_POST = """
+static inline int tarnreporting_report_post(tarnreporting_writer* writer, const tarnreporting_reports* reports,
+                                            int report, uint64_t stamp_ns, const tarnreporting_value* values,
+                                            size_t count) {
+  if (reports == NULL) return TARNREPORTING_ARGUMENT;
+  if (stamp_ns == 0) return tarnreporting_post(writer, reports->shapes[report], values, count);
+  return tarnreporting_post_at(writer, reports->shapes[report], stamp_ns, values, count);
+}
+"""
 C_DECLARE = """
 /* Declares all of them for the session. */
 static inline int tarnreporting_reports_declare(tarnreporting_session* session, tarnreporting_reports* reports) {
@@ -72,14 +82,9 @@ static inline int tarnreporting_reports_declare(tarnreporting_session* session, 
   size_t i;
   if (reports == NULL) return TARNREPORTING_ARGUMENT;
   for (i = 0; i < TARNREPORTING_REPORT_COUNT; ++i) {
-    tarnreporting_shape_options options;
-    int result;
-    options.size = sizeof options;
-    options.category = rows[i].category;
-    options.type = rows[i].type;
-    options.keys = rows[i].keys;
-    options.key_count = rows[i].key_count;
-    result = tarnreporting_shape_declare(session, &options, &reports->shapes[i]);
+    const tarnreporting_shape_options options = {sizeof options, rows[i].category, rows[i].type, rows[i].keys,
+                                                 rows[i].key_count};
+    const int result = tarnreporting_shape_declare(session, &options, &reports->shapes[i]);
     if (result != TARNREPORTING_OK) return result;
   }
   return TARNREPORTING_OK;
@@ -98,7 +103,8 @@ CPP_TOP = f"""\
 //   const tarnreporting::Reports reports(session);         // once; throws tarnreporting::Error
 //   reports.outputRunning(writer, 0.5, "Speaker");         // in the audio thread
 //
-// Each posts one message as Writer::post() does. The reports may not be used after their session ended.
+// Each posts one message as Writer::post() does, with the time of the event in nanoseconds since 1970 UTC, or with 0
+// that of the call. The reports may not be used after their session ended.
 //
 // {NOTE}
 #pragma once
@@ -133,7 +139,7 @@ PYTHON_TOP = f'''\
 {NOTE}
 """
 
-from typing import Dict, Tuple
+from typing import Dict, Optional, Tuple
 
 # Category, type, and each key with the kind of its values.
 REPORTS: Dict[str, Tuple[int, int, Dict[str, type]]] = {{
@@ -142,9 +148,10 @@ PYTHON_CLASS = '''}
 
 
 class Reports:
-    """What a session can report without a key. Each answers whether the message was posted."""
+    """What a session can report without a key, with the time of the call or `stamp`, in seconds since 1970 UTC. Each
+    answers whether the message was posted."""
 
-    def _report(self, name: str, *values: object) -> bool:
+    def _report(self, name: str, stamp: Optional[float], *values: object) -> bool:
         raise NotImplementedError
 '''
 
@@ -156,7 +163,7 @@ def c_reports(table):
              "  tarnreporting_shape* shapes[TARNREPORTING_REPORT_COUNT];", "};"]
     most = max((len(report.fields) for report in table.reports), default=1)
     rows = "\n".join(c_row(table, report) for report in table.reports)
-    return (C_TOP + "\n".join(lines) + "\n" + C_HELPERS + C_DECLARE % {"most": most, "rows": rows}
+    return (C_TOP + "\n".join(lines) + "\n" + C_HELPERS + C_DECLARE % {"most": most, "rows": rows} + C_POST
             + "".join(c_function(table, report) for report in table.reports) + C_END)
 
 
@@ -190,19 +197,22 @@ def listed(head, items, end):
 
 
 def c_function(table, report):
-    arguments = ["const tarnreporting_reports* reports"]
-    arguments += [("uint32_t " if each.hertz else C_TYPES[table.kind_of(each.key)]) + each.argument
-                  for each in report.arguments()]
-    head = f"static inline int tarnreporting_report_{word(report)}("
-    lines = ["", "/* " + "\n * ".join(textwrap.wrap(report.text, COLUMNS - 6)) + " */",
-             *listed(head, ["tarnreporting_writer* writer", *arguments], ") {")]
+    """One with the time of the event, and one with that of the call."""
+    arguments = [("uint32_t " if each.hertz else C_TYPES[table.kind_of(each.key)]) + each.argument
+                 for each in report.arguments()]
+    head = f"static inline int tarnreporting_report_{word(report)}"
+    first = ["tarnreporting_writer* writer", "const tarnreporting_reports* reports"]
+    lines = ["", *listed(f"{head}_at(", [*first, "uint64_t stamp_ns", *arguments], ") {")]
     if any(each.hertz for each in report.fields):
         lines.append("  char room[12];")
     lines.append(f"  tarnreporting_value values[{len(report.fields)}];")
     lines += [f"  values[{at}] = {c_value(table, each)};" for at, each in enumerate(report.fields)]
-    shape = f"reports->shapes[TARNREPORTING_REPORT_{word(report).upper()}]"
-    lines += ["  if (reports == NULL) return TARNREPORTING_ARGUMENT;",
-              f"  return tarnreporting_post(writer, {shape}, values, {len(report.fields)});", "}"]
+    index = f"TARNREPORTING_REPORT_{word(report).upper()}"
+    lines += [f"  return tarnreporting_report_post(writer, reports, {index}, stamp_ns, values, {len(report.fields)});",
+              "}", "/* " + "\n * ".join(textwrap.wrap(report.text, COLUMNS - 6)) + " */",
+              *listed(f"{head}(", [*first, *arguments], ") {")]
+    given = ["writer", "reports", "0", *(each.argument for each in report.arguments())]
+    lines += [f"  return tarnreporting_report_{word(report)}_at({', '.join(given)});", "}"]
     return "\n".join(lines) + "\n"
 
 
@@ -224,13 +234,13 @@ def cpp_reports(table):
 def cpp_operation(table, report):
     first, *rest = report.name.split()
     name = first + "".join(each.title() for each in rest)
-    arguments = "".join(f", {'std::uint32_t ' if each.hertz else CPP_TYPES[table.kind_of(each.key)]}{each.argument}"
-                        for each in report.arguments())
-    given = "".join(f", {each.argument}" for each in report.arguments())
+    arguments = [("std::uint32_t " if each.hertz else CPP_TYPES[table.kind_of(each.key)]) + each.argument
+                 for each in report.arguments()]
+    given = ["writer.raw()", "&reports_", "stamp", *(each.argument for each in report.arguments())]
     return "\n".join(["", *comment("  // ", report.text),
-                      f"  Result {name}(Writer& writer{arguments}) const noexcept {{",
-                      f"    return Result(tarnreporting_report_{word(report)}(writer.raw(), &reports_{given}));",
-                      "  }", ""])
+                      *listed(f"  Result {name}(", ["Writer& writer", *arguments, "std::uint64_t stamp = 0"],
+                              ") const noexcept {"),
+                      f"    return Result(tarnreporting_report_{word(report)}_at({', '.join(given)}));", "  }", ""])
 
 
 def python_reports(table):
@@ -247,12 +257,14 @@ def python_reports(table):
 
 
 def python_method(table, report):
-    arguments = "".join(f", {each.argument}: {'int' if each.hertz else PYTHON_KINDS[table.kind_of(each.key)]}"
-                        for each in report.arguments())
+    arguments = [f"{each.argument}: {'int' if each.hertz else PYTHON_KINDS[table.kind_of(each.key)]}"
+                 for each in report.arguments()]
     values = "".join(f", {python_value(each)}" for each in report.fields)
     said = "\n        ".join(textwrap.wrap(report.text, COLUMNS - 16))
-    return (f'\n    def {word(report)}(self{arguments}) -> bool:\n        """{said}"""\n'
-            f'        return self._report("{word(report)}"{values})\n')
+    head = f"    def {word(report)}("
+    arguments = listed(head, ["self", *arguments, "*", "stamp: Optional[float] = None"], ") -> bool:")
+    return ("\n" + "\n".join(arguments) + f'\n        """{said}"""\n'
+            f'        return self._report("{word(report)}", stamp{values})\n')
 
 
 def python_value(each):

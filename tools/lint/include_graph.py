@@ -34,6 +34,8 @@ ROOMS = {
     "clients/ring": (),
     "clients/c/include": (),
     "clients/c/src": ("clients/ring", "clients/c/include"),
+    # A program of somebody else, who has the installed headers alone.
+    "examples/wavplay": (),
     # What can be said, as data, and the constants that are made of it.
     "dictionary": (),
     "platform": VALUES,

@@ -4,8 +4,9 @@
  *   tarnreporting_reports_declare(session, &reports);                          once
  *   tarnreporting_report_output_running(writer, &reports, 0.5, "Speaker");     in the audio thread
  *
- * Each posts one message as tarnreporting_post() does, with its promises and its results. A text that is null counts as
- * empty. The reports are gone with their session; each takes one of the client's shapes.
+ * Each posts one message as tarnreporting_post() does, with its promises and its results; those with _at post the time
+ * of the event, in nanoseconds since 1970 UTC (0: the time of the call). A text that is null counts as empty. The
+ * reports are gone with their session; each takes one of the client's shapes.
  *
  * Made by tools/dictionary/generate.py from dictionary/messages.toml: change that, not this. */
 #pragma once
@@ -87,118 +88,157 @@ static inline int tarnreporting_reports_declare(tarnreporting_session* session, 
   size_t i;
   if (reports == NULL) return TARNREPORTING_ARGUMENT;
   for (i = 0; i < TARNREPORTING_REPORT_COUNT; ++i) {
-    tarnreporting_shape_options options;
-    int result;
-    options.size = sizeof options;
-    options.category = rows[i].category;
-    options.type = rows[i].type;
-    options.keys = rows[i].keys;
-    options.key_count = rows[i].key_count;
-    result = tarnreporting_shape_declare(session, &options, &reports->shapes[i]);
+    const tarnreporting_shape_options options = {sizeof options, rows[i].category, rows[i].type, rows[i].keys,
+                                                 rows[i].key_count};
+    const int result = tarnreporting_shape_declare(session, &options, &reports->shapes[i]);
     if (result != TARNREPORTING_OK) return result;
   }
   return TARNREPORTING_OK;
 }
 
-/* Output runs from now on, at this volume (0 to 1), on this route. */
-static inline int tarnreporting_report_output_running(tarnreporting_writer* writer,
-                                                      const tarnreporting_reports* reports, double volume,
-                                                      const char* route) {
+static inline int tarnreporting_report_post(tarnreporting_writer* writer, const tarnreporting_reports* reports,
+                                            int report, uint64_t stamp_ns, const tarnreporting_value* values,
+                                            size_t count) {
+  if (reports == NULL) return TARNREPORTING_ARGUMENT;
+  if (stamp_ns == 0) return tarnreporting_post(writer, reports->shapes[report], values, count);
+  return tarnreporting_post_at(writer, reports->shapes[report], stamp_ns, values, count);
+}
+
+static inline int tarnreporting_report_output_running_at(tarnreporting_writer* writer,
+                                                         const tarnreporting_reports* reports, uint64_t stamp_ns,
+                                                         double volume, const char* route) {
   tarnreporting_value values[3];
   values[0] = tarnreporting_boolean(1);
   values[1] = tarnreporting_double(volume);
   values[2] = tarnreporting_report_text(route);
-  if (reports == NULL) return TARNREPORTING_ARGUMENT;
-  return tarnreporting_post(writer, reports->shapes[TARNREPORTING_REPORT_OUTPUT_RUNNING], values, 3);
+  return tarnreporting_report_post(writer, reports, TARNREPORTING_REPORT_OUTPUT_RUNNING, stamp_ns, values, 3);
+}
+/* Output runs from now on, at this volume (0 to 1), on this route. */
+static inline int tarnreporting_report_output_running(tarnreporting_writer* writer,
+                                                      const tarnreporting_reports* reports, double volume,
+                                                      const char* route) {
+  return tarnreporting_report_output_running_at(writer, reports, 0, volume, route);
 }
 
+static inline int tarnreporting_report_output_stopped_at(tarnreporting_writer* writer,
+                                                         const tarnreporting_reports* reports, uint64_t stamp_ns) {
+  tarnreporting_value values[1];
+  values[0] = tarnreporting_boolean(0);
+  return tarnreporting_report_post(writer, reports, TARNREPORTING_REPORT_OUTPUT_STOPPED, stamp_ns, values, 1);
+}
 /* Output runs no more. */
 static inline int tarnreporting_report_output_stopped(tarnreporting_writer* writer,
                                                       const tarnreporting_reports* reports) {
-  tarnreporting_value values[1];
-  values[0] = tarnreporting_boolean(0);
-  if (reports == NULL) return TARNREPORTING_ARGUMENT;
-  return tarnreporting_post(writer, reports->shapes[TARNREPORTING_REPORT_OUTPUT_STOPPED], values, 1);
+  return tarnreporting_report_output_stopped_at(writer, reports, 0);
 }
 
+static inline int tarnreporting_report_volume_changed_at(tarnreporting_writer* writer,
+                                                         const tarnreporting_reports* reports, uint64_t stamp_ns,
+                                                         double volume) {
+  tarnreporting_value values[1];
+  values[0] = tarnreporting_double(volume);
+  return tarnreporting_report_post(writer, reports, TARNREPORTING_REPORT_VOLUME_CHANGED, stamp_ns, values, 1);
+}
 /* The volume is this from now on, 0 to 1. */
 static inline int tarnreporting_report_volume_changed(tarnreporting_writer* writer,
                                                       const tarnreporting_reports* reports, double volume) {
-  tarnreporting_value values[1];
-  values[0] = tarnreporting_double(volume);
-  if (reports == NULL) return TARNREPORTING_ARGUMENT;
-  return tarnreporting_post(writer, reports->shapes[TARNREPORTING_REPORT_VOLUME_CHANGED], values, 1);
+  return tarnreporting_report_volume_changed_at(writer, reports, 0, volume);
 }
 
+static inline int tarnreporting_report_route_changed_at(tarnreporting_writer* writer,
+                                                        const tarnreporting_reports* reports, uint64_t stamp_ns,
+                                                        const char* route) {
+  tarnreporting_value values[1];
+  values[0] = tarnreporting_report_text(route);
+  return tarnreporting_report_post(writer, reports, TARNREPORTING_REPORT_ROUTE_CHANGED, stamp_ns, values, 1);
+}
 /* These devices play or record from now on. */
 static inline int tarnreporting_report_route_changed(tarnreporting_writer* writer, const tarnreporting_reports* reports,
                                                      const char* route) {
-  tarnreporting_value values[1];
-  values[0] = tarnreporting_report_text(route);
-  if (reports == NULL) return TARNREPORTING_ARGUMENT;
-  return tarnreporting_post(writer, reports->shapes[TARNREPORTING_REPORT_ROUTE_CHANGED], values, 1);
+  return tarnreporting_report_route_changed_at(writer, reports, 0, route);
 }
 
-/* Input runs from now on, on this route, with this voice codec at this sampling rate in Hz. */
-static inline int tarnreporting_report_input_running(tarnreporting_writer* writer, const tarnreporting_reports* reports,
-                                                     const char* route, const char* codec, uint32_t rate) {
+static inline int tarnreporting_report_input_running_at(tarnreporting_writer* writer,
+                                                        const tarnreporting_reports* reports, uint64_t stamp_ns,
+                                                        const char* route, const char* codec, uint32_t rate) {
   char room[12];
   tarnreporting_value values[4];
   values[0] = tarnreporting_boolean(1);
   values[1] = tarnreporting_report_text(route);
   values[2] = tarnreporting_report_text(codec);
   values[3] = tarnreporting_report_hertz(rate, room);
-  if (reports == NULL) return TARNREPORTING_ARGUMENT;
-  return tarnreporting_post(writer, reports->shapes[TARNREPORTING_REPORT_INPUT_RUNNING], values, 4);
+  return tarnreporting_report_post(writer, reports, TARNREPORTING_REPORT_INPUT_RUNNING, stamp_ns, values, 4);
+}
+/* Input runs from now on, on this route, with this voice codec at this sampling rate in Hz. */
+static inline int tarnreporting_report_input_running(tarnreporting_writer* writer, const tarnreporting_reports* reports,
+                                                     const char* route, const char* codec, uint32_t rate) {
+  return tarnreporting_report_input_running_at(writer, reports, 0, route, codec, rate);
 }
 
-/* The voice codec is this from now on, at this sampling rate in Hz. */
-static inline int tarnreporting_report_codec_changed(tarnreporting_writer* writer, const tarnreporting_reports* reports,
-                                                     const char* codec, uint32_t rate) {
+static inline int tarnreporting_report_codec_changed_at(tarnreporting_writer* writer,
+                                                        const tarnreporting_reports* reports, uint64_t stamp_ns,
+                                                        const char* codec, uint32_t rate) {
   char room[12];
   tarnreporting_value values[2];
   values[0] = tarnreporting_report_text(codec);
   values[1] = tarnreporting_report_hertz(rate, room);
-  if (reports == NULL) return TARNREPORTING_ARGUMENT;
-  return tarnreporting_post(writer, reports->shapes[TARNREPORTING_REPORT_CODEC_CHANGED], values, 2);
+  return tarnreporting_report_post(writer, reports, TARNREPORTING_REPORT_CODEC_CHANGED, stamp_ns, values, 2);
+}
+/* The voice codec is this from now on, at this sampling rate in Hz. */
+static inline int tarnreporting_report_codec_changed(tarnreporting_writer* writer, const tarnreporting_reports* reports,
+                                                     const char* codec, uint32_t rate) {
+  return tarnreporting_report_codec_changed_at(writer, reports, 0, codec, rate);
 }
 
+static inline int tarnreporting_report_input_stopped_at(tarnreporting_writer* writer,
+                                                        const tarnreporting_reports* reports, uint64_t stamp_ns) {
+  tarnreporting_value values[1];
+  values[0] = tarnreporting_boolean(0);
+  return tarnreporting_report_post(writer, reports, TARNREPORTING_REPORT_INPUT_STOPPED, stamp_ns, values, 1);
+}
 /* Input runs no more. */
 static inline int tarnreporting_report_input_stopped(tarnreporting_writer* writer,
                                                      const tarnreporting_reports* reports) {
-  tarnreporting_value values[1];
-  values[0] = tarnreporting_boolean(0);
-  if (reports == NULL) return TARNREPORTING_ARGUMENT;
-  return tarnreporting_post(writer, reports->shapes[TARNREPORTING_REPORT_INPUT_STOPPED], values, 1);
+  return tarnreporting_report_input_stopped_at(writer, reports, 0);
 }
 
-/* A cycle came too late, or a buffer ran empty: its size in frames, and which cycle it was. */
-static inline int tarnreporting_report_overload(tarnreporting_writer* writer, const tarnreporting_reports* reports,
-                                                int64_t frames, int64_t cycle) {
+static inline int tarnreporting_report_overload_at(tarnreporting_writer* writer, const tarnreporting_reports* reports,
+                                                   uint64_t stamp_ns, int64_t frames, int64_t cycle) {
   tarnreporting_value values[3];
   values[0] = tarnreporting_text("overload", 8);
   values[1] = tarnreporting_integer(frames);
   values[2] = tarnreporting_integer(cycle);
-  if (reports == NULL) return TARNREPORTING_ARGUMENT;
-  return tarnreporting_post(writer, reports->shapes[TARNREPORTING_REPORT_OVERLOAD], values, 3);
+  return tarnreporting_report_post(writer, reports, TARNREPORTING_REPORT_OVERLOAD, stamp_ns, values, 3);
+}
+/* A cycle came too late, or a buffer ran empty: its size in frames, and which cycle it was. */
+static inline int tarnreporting_report_overload(tarnreporting_writer* writer, const tarnreporting_reports* reports,
+                                                int64_t frames, int64_t cycle) {
+  return tarnreporting_report_overload_at(writer, reports, 0, frames, cycle);
 }
 
+static inline int tarnreporting_report_error_at(tarnreporting_writer* writer, const tarnreporting_reports* reports,
+                                                uint64_t stamp_ns, const char* what) {
+  tarnreporting_value values[1];
+  values[0] = tarnreporting_report_text(what);
+  return tarnreporting_report_post(writer, reports, TARNREPORTING_REPORT_ERROR, stamp_ns, values, 1);
+}
 /* Something else went wrong; what, in a word or two. */
 static inline int tarnreporting_report_error(tarnreporting_writer* writer, const tarnreporting_reports* reports,
                                              const char* what) {
-  tarnreporting_value values[1];
-  values[0] = tarnreporting_report_text(what);
-  if (reports == NULL) return TARNREPORTING_ARGUMENT;
-  return tarnreporting_post(writer, reports->shapes[TARNREPORTING_REPORT_ERROR], values, 1);
+  return tarnreporting_report_error_at(writer, reports, 0, what);
 }
 
+static inline int tarnreporting_report_session_duration_at(tarnreporting_writer* writer,
+                                                           const tarnreporting_reports* reports, uint64_t stamp_ns,
+                                                           double seconds) {
+  tarnreporting_value values[1];
+  values[0] = tarnreporting_double(seconds);
+  return tarnreporting_report_post(writer, reports, TARNREPORTING_REPORT_SESSION_DURATION, stamp_ns, values, 1);
+}
 /* What the session was for is over, and was active for so many seconds. */
 static inline int tarnreporting_report_session_duration(tarnreporting_writer* writer,
                                                         const tarnreporting_reports* reports, double seconds) {
-  tarnreporting_value values[1];
-  values[0] = tarnreporting_double(seconds);
-  if (reports == NULL) return TARNREPORTING_ARGUMENT;
-  return tarnreporting_post(writer, reports->shapes[TARNREPORTING_REPORT_SESSION_DURATION], values, 1);
+  return tarnreporting_report_session_duration_at(writer, reports, 0, seconds);
 }
 
 /* clang-format on */

@@ -3,7 +3,8 @@
 //   const tarnreporting::Reports reports(session);         // once; throws tarnreporting::Error
 //   reports.outputRunning(writer, 0.5, "Speaker");         // in the audio thread
 //
-// Each posts one message as Writer::post() does. The reports may not be used after their session ended.
+// Each posts one message as Writer::post() does, with the time of the event in nanoseconds since 1970 UTC, or with 0
+// that of the call. The reports may not be used after their session ended.
 //
 // Made by tools/dictionary/generate.py from dictionary/messages.toml: change that, not this.
 #pragma once
@@ -25,53 +26,54 @@ class Reports {
   }
 
   // Output runs from now on, at this volume (0 to 1), on this route.
-  Result outputRunning(Writer& writer, double volume, const char* route) const noexcept {
-    return Result(tarnreporting_report_output_running(writer.raw(), &reports_, volume, route));
+  Result outputRunning(Writer& writer, double volume, const char* route, std::uint64_t stamp = 0) const noexcept {
+    return Result(tarnreporting_report_output_running_at(writer.raw(), &reports_, stamp, volume, route));
   }
 
   // Output runs no more.
-  Result outputStopped(Writer& writer) const noexcept {
-    return Result(tarnreporting_report_output_stopped(writer.raw(), &reports_));
+  Result outputStopped(Writer& writer, std::uint64_t stamp = 0) const noexcept {
+    return Result(tarnreporting_report_output_stopped_at(writer.raw(), &reports_, stamp));
   }
 
   // The volume is this from now on, 0 to 1.
-  Result volumeChanged(Writer& writer, double volume) const noexcept {
-    return Result(tarnreporting_report_volume_changed(writer.raw(), &reports_, volume));
+  Result volumeChanged(Writer& writer, double volume, std::uint64_t stamp = 0) const noexcept {
+    return Result(tarnreporting_report_volume_changed_at(writer.raw(), &reports_, stamp, volume));
   }
 
   // These devices play or record from now on.
-  Result routeChanged(Writer& writer, const char* route) const noexcept {
-    return Result(tarnreporting_report_route_changed(writer.raw(), &reports_, route));
+  Result routeChanged(Writer& writer, const char* route, std::uint64_t stamp = 0) const noexcept {
+    return Result(tarnreporting_report_route_changed_at(writer.raw(), &reports_, stamp, route));
   }
 
   // Input runs from now on, on this route, with this voice codec at this sampling rate in Hz.
-  Result inputRunning(Writer& writer, const char* route, const char* codec, std::uint32_t rate) const noexcept {
-    return Result(tarnreporting_report_input_running(writer.raw(), &reports_, route, codec, rate));
+  Result inputRunning(Writer& writer, const char* route, const char* codec, std::uint32_t rate,
+                      std::uint64_t stamp = 0) const noexcept {
+    return Result(tarnreporting_report_input_running_at(writer.raw(), &reports_, stamp, route, codec, rate));
   }
 
   // The voice codec is this from now on, at this sampling rate in Hz.
-  Result codecChanged(Writer& writer, const char* codec, std::uint32_t rate) const noexcept {
-    return Result(tarnreporting_report_codec_changed(writer.raw(), &reports_, codec, rate));
+  Result codecChanged(Writer& writer, const char* codec, std::uint32_t rate, std::uint64_t stamp = 0) const noexcept {
+    return Result(tarnreporting_report_codec_changed_at(writer.raw(), &reports_, stamp, codec, rate));
   }
 
   // Input runs no more.
-  Result inputStopped(Writer& writer) const noexcept {
-    return Result(tarnreporting_report_input_stopped(writer.raw(), &reports_));
+  Result inputStopped(Writer& writer, std::uint64_t stamp = 0) const noexcept {
+    return Result(tarnreporting_report_input_stopped_at(writer.raw(), &reports_, stamp));
   }
 
   // A cycle came too late, or a buffer ran empty: its size in frames, and which cycle it was.
-  Result overload(Writer& writer, std::int64_t frames, std::int64_t cycle) const noexcept {
-    return Result(tarnreporting_report_overload(writer.raw(), &reports_, frames, cycle));
+  Result overload(Writer& writer, std::int64_t frames, std::int64_t cycle, std::uint64_t stamp = 0) const noexcept {
+    return Result(tarnreporting_report_overload_at(writer.raw(), &reports_, stamp, frames, cycle));
   }
 
   // Something else went wrong; what, in a word or two.
-  Result error(Writer& writer, const char* what) const noexcept {
-    return Result(tarnreporting_report_error(writer.raw(), &reports_, what));
+  Result error(Writer& writer, const char* what, std::uint64_t stamp = 0) const noexcept {
+    return Result(tarnreporting_report_error_at(writer.raw(), &reports_, stamp, what));
   }
 
   // What the session was for is over, and was active for so many seconds.
-  Result sessionDuration(Writer& writer, double seconds) const noexcept {
-    return Result(tarnreporting_report_session_duration(writer.raw(), &reports_, seconds));
+  Result sessionDuration(Writer& writer, double seconds, std::uint64_t stamp = 0) const noexcept {
+    return Result(tarnreporting_report_session_duration_at(writer.raw(), &reports_, stamp, seconds));
   }
 
  private:

@@ -301,12 +301,12 @@ class Session(Reports):
             raise Error(Result.CLOSED)
         return self._handle
 
-    def _report(self, name: str, *values: object) -> bool:
+    def _report(self, name: str, stamp: Optional[float], *values: object) -> bool:
         with self._client._lock:
             shape = self._reports.get(name)
             if shape is None:
                 shape = self._reports[name] = Shape(self, *REPORTS[name])
-        return shape.post(*values)
+        return shape.post(*values, stamp=stamp)
 
 
 _KINDS: Dict[Type[Any], int] = {bool: c.BOOLEAN, int: c.INTEGER, float: c.DOUBLE, str: c.TEXT,

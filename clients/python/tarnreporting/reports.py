@@ -3,7 +3,7 @@
 Made by tools/dictionary/generate.py from dictionary/messages.toml: change that, not this.
 """
 
-from typing import Dict, Tuple
+from typing import Dict, Optional, Tuple
 
 # Category, type, and each key with the kind of its values.
 REPORTS: Dict[str, Tuple[int, int, Dict[str, type]]] = {
@@ -26,47 +26,48 @@ REPORTS: Dict[str, Tuple[int, int, Dict[str, type]]] = {
 
 
 class Reports:
-    """What a session can report without a key. Each answers whether the message was posted."""
+    """What a session can report without a key, with the time of the call or `stamp`, in seconds since 1970 UTC. Each
+    answers whether the message was posted."""
 
-    def _report(self, name: str, *values: object) -> bool:
+    def _report(self, name: str, stamp: Optional[float], *values: object) -> bool:
         raise NotImplementedError
 
-    def output_running(self, volume: float, route: str) -> bool:
+    def output_running(self, volume: float, route: str, *, stamp: Optional[float] = None) -> bool:
         """Output runs from now on, at this volume (0 to 1), on this route."""
-        return self._report("output_running", True, volume, route)
+        return self._report("output_running", stamp, True, volume, route)
 
-    def output_stopped(self) -> bool:
+    def output_stopped(self, *, stamp: Optional[float] = None) -> bool:
         """Output runs no more."""
-        return self._report("output_stopped", False)
+        return self._report("output_stopped", stamp, False)
 
-    def volume_changed(self, volume: float) -> bool:
+    def volume_changed(self, volume: float, *, stamp: Optional[float] = None) -> bool:
         """The volume is this from now on, 0 to 1."""
-        return self._report("volume_changed", volume)
+        return self._report("volume_changed", stamp, volume)
 
-    def route_changed(self, route: str) -> bool:
+    def route_changed(self, route: str, *, stamp: Optional[float] = None) -> bool:
         """These devices play or record from now on."""
-        return self._report("route_changed", route)
+        return self._report("route_changed", stamp, route)
 
-    def input_running(self, route: str, codec: str, rate: int) -> bool:
+    def input_running(self, route: str, codec: str, rate: int, *, stamp: Optional[float] = None) -> bool:
         """Input runs from now on, on this route, with this voice codec at this sampling rate in Hz."""
-        return self._report("input_running", True, route, codec, f"{int(rate)}.0")
+        return self._report("input_running", stamp, True, route, codec, f"{int(rate)}.0")
 
-    def codec_changed(self, codec: str, rate: int) -> bool:
+    def codec_changed(self, codec: str, rate: int, *, stamp: Optional[float] = None) -> bool:
         """The voice codec is this from now on, at this sampling rate in Hz."""
-        return self._report("codec_changed", codec, f"{int(rate)}.0")
+        return self._report("codec_changed", stamp, codec, f"{int(rate)}.0")
 
-    def input_stopped(self) -> bool:
+    def input_stopped(self, *, stamp: Optional[float] = None) -> bool:
         """Input runs no more."""
-        return self._report("input_stopped", False)
+        return self._report("input_stopped", stamp, False)
 
-    def overload(self, frames: int, cycle: int) -> bool:
+    def overload(self, frames: int, cycle: int, *, stamp: Optional[float] = None) -> bool:
         """A cycle came too late, or a buffer ran empty: its size in frames, and which cycle it was."""
-        return self._report("overload", "overload", frames, cycle)
+        return self._report("overload", stamp, "overload", frames, cycle)
 
-    def error(self, what: str) -> bool:
+    def error(self, what: str, *, stamp: Optional[float] = None) -> bool:
         """Something else went wrong; what, in a word or two."""
-        return self._report("error", what)
+        return self._report("error", stamp, what)
 
-    def session_duration(self, seconds: float) -> bool:
+    def session_duration(self, seconds: float, *, stamp: Optional[float] = None) -> bool:
         """What the session was for is over, and was active for so many seconds."""
-        return self._report("session_duration", seconds)
+        return self._report("session_duration", stamp, seconds)

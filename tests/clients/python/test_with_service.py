@@ -32,12 +32,12 @@ class Recorded(WithService):
         self.start()
         with tarnreporting.Client(self.socket) as client:
             with client.session(ServiceType.LONG_FORM_AUDIO, "org.example.player") as session:
-                session.output_running(0.5, "Speaker")
-                time.sleep(0.6)  # what is shorter isn't told
-                session.output_stopped()
+                now = time.time()
+                session.output_running(0.5, "Speaker", stamp=now)
+                session.output_stopped(stamp=now + 1.25)
             [summary] = self.events_once_there_are(1, "Volume.Summary")
         self.assertEqual((summary["KvSessionVolume"], summary["active_devices"]), (0.5, "Speaker"))
-        self.assertGreaterEqual(summary["play_seconds"], 0.6)
+        self.assertAlmostEqual(summary["play_seconds"], 1.25, 3)
 
     def test_nothing_that_threads_posted_is_lost_over_a_restart(self):
         self.start()
