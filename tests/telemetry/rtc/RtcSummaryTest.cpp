@@ -211,15 +211,15 @@ TEST_F(RtcSummary, IsCutAtItsLimitBetweenTwoMessages) {
     messages.push_back(message({{"a", "xxxxx"}, {"b", n}}));
     messages.back()->setIsSessionStarted(true);
   }
-  const auto whole = TarnReportingMakeRtcSummary(AudioServiceType::Generic, messages);
+  const auto whole = TarnReportingMakeRtcSummary(AudioServiceType::Generic, {{}, messages});
   EXPECT_TRUE(whole.complete);
   EXPECT_EQ(whole.payload["b"].text(), "0,1,2,3");
   // The keys are 28 bytes, "0" and "xxxxx" and "0" seven more, ",xxxxx" and ",1" another eight.
-  const auto cut = TarnReportingMakeRtcSummary(AudioServiceType::Generic, messages, 43);
+  const auto cut = TarnReportingMakeRtcSummary(AudioServiceType::Generic, {{}, messages}, 43);
   EXPECT_FALSE(cut.complete);
   EXPECT_EQ(cut.payload["a"].text(), "xxxxx,xxxxx");
   EXPECT_EQ(cut.payload["b"].text(), "0,1");
-  EXPECT_EQ(TarnReportingMakeRtcSummary(AudioServiceType::Generic, messages, 44).payload["b"].text(), "0,1,2");
+  EXPECT_EQ(TarnReportingMakeRtcSummary(AudioServiceType::Generic, {{}, messages}, 44).payload["b"].text(), "0,1,2");
 }
 
 TEST_F(RtcSummary, LimitLeavesRoomBelowTheLongestTextOfTheService) {
@@ -246,7 +246,7 @@ TEST_F(RtcSummary, KeysCountTowardsTheLimit) {
     messages.push_back(message({{key, ""}}));
     messages.back()->setIsSessionStarted(true);
   }
-  const auto cut = TarnReportingMakeRtcSummary(AudioServiceType::Generic, messages, 50);
+  const auto cut = TarnReportingMakeRtcSummary(AudioServiceType::Generic, {{}, messages}, 50);
   EXPECT_FALSE(cut.complete);
   EXPECT_EQ(cut.payload.size(), 3U);  // with the event's own
 }
@@ -289,7 +289,7 @@ TEST_F(RtcSummary, IsWhatAnObviousModelSaysOfRandomMessages) {
         }
         expected.set(plist::Key(key), joined);
       }
-      const auto summary = TarnReportingMakeRtcSummary(type, messages);
+      const auto summary = TarnReportingMakeRtcSummary(type, {{}, messages});
       ASSERT_TRUE(summary.complete);
       ASSERT_EQ(summary.payload, expected) << plist::description(summary.payload);
     }
