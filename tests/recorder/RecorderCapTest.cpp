@@ -85,18 +85,25 @@ TEST_F(RecorderCap, OfAFolderTheOldestFilesGoAndNoLinkIsFollowed) {
 
 TEST_F(RecorderCap, AReaderThatHoldsUpTheLogIsNamed) {
   options_.longLogBytes = kMegabyte;
-  start();
-  recordMany(10);
-  ASSERT_TRUE(flush());
+  int go[2];
   int ready[2];
+  ASSERT_EQ(::pipe(go), 0);
   ASSERT_EQ(::pipe(ready), 0);
   ChildProcess child([&] {
+    char got = 0;
+    ASSERT_EQ(::read(go[0], &got, 1), 1);
     sqlite3* reader = nullptr;
     ASSERT_EQ(sqlite3_open_v2(file().c_str(), &reader, SQLITE_OPEN_READONLY, nullptr), SQLITE_OK);
     ASSERT_EQ(sqlite3_exec(reader, "BEGIN; SELECT count(*) FROM events", nullptr, nullptr, nullptr), SQLITE_OK);
     ASSERT_EQ(::write(ready[1], "x", 1), 1);
     ::pause();
   });
+  ::close(go[0]);
+  ::close(ready[1]);
+  start();
+  recordMany(10);
+  ASSERT_TRUE(flush());
+  ASSERT_EQ(::write(go[1], "x", 1), 1);
   char got = 0;
   ASSERT_EQ(::read(ready[0], &got, 1), 1);
   for (int round = 0; round < 10; ++round) {
@@ -106,8 +113,8 @@ TEST_F(RecorderCap, AReaderThatHoldsUpTheLogIsNamed) {
   EXPECT_TRUE(eventually([&] { return log_.count("MiB, held up by readers of an old state: process ") == 1; }));
   EXPECT_EQ(errors(), 1U);
   child.killAndWait();
+  ::close(go[1]);
   ::close(ready[0]);
-  ::close(ready[1]);
 }
 
 }  // namespace
