@@ -50,7 +50,7 @@ EventWriter::EventWriter(const RecorderOptions& options, platform::Log& log, con
       clock_(clock),
       log_(log),
       file_(options.file, limitsOf(options), clock, options.boot.empty() ? RecorderTime::currentBoot() : options.boot),
-      usage_(options.file, options.folders, capOf(options)) {
+      usage_(options.file, options.kinds, options.asideMaxAgeDays, capOf(options)) {
   file_.setLogLimit(static_cast<std::int64_t>(transactionBytes(options)));
 }
 
@@ -110,8 +110,8 @@ Status EventWriter::noteMissing() {
 
 void EventWriter::tidy() {
   if (!carrying_) {
-    for (const std::string& name : usage_.tidy()) {
-      log_.notice("recorder removed " + name + ": its kind is over its share");
+    for (const std::string& gone : usage_.tidy([this](double wall) { return file_.ageOf(wall); })) {
+      log_.notice("recorder removed " + gone);
     }
   }
   limitDatabase();
@@ -253,9 +253,10 @@ bool EventWriter::verify() {
 Status EventWriter::maintainOnce() {
   Status error = openOnce();
   if (error.ok()) {
-    tidy();
+    error = file_.keepTime();
   }
   if (error.ok()) {
+    tidy();
     error = file_.begin();
   }
   if (error.ok()) {

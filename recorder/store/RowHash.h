@@ -7,6 +7,7 @@
 #include <bit>
 #include <cstddef>
 #include <cstdint>
+#include <cstring>
 #include <string_view>
 
 namespace tarn::recorder {
@@ -32,8 +33,13 @@ class RowHash {
   std::uint64_t value() const noexcept { return state_; }
 
  private:
+  // Little-endian, as all machines read what one wrote.
   static std::uint64_t chunk(std::string_view bytes) noexcept {
     std::uint64_t value = 0;
+    if constexpr (std::endian::native == std::endian::little) {
+      std::memcpy(&value, bytes.data(), bytes.size());
+      return value;
+    }
     for (std::size_t i = bytes.size(); i-- > 0;) {
       value = value << 8U | static_cast<unsigned char>(bytes[i]);
     }

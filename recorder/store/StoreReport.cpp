@@ -14,16 +14,24 @@ namespace {
 
 constexpr int kBusyMilliseconds = 2000;
 
-// In a directory that can't be written to there can be no index of a log; without a log the file is all there is.
-Status open(Connection& connection, const std::filesystem::path& file) {
+// As everybody would open it, or overlooking what can be overlooked.
+Status openAs(Connection& connection, const std::string& name, bool tolerant) {
+  Status error = connection.errorOf(connection.open(name, SQLITE_OPEN_READONLY));
+  if (error.failed()) return error;
+  sqlite3_busy_timeout(connection.handle(), kBusyMilliseconds);
+  sqlite3_db_config(connection.handle(), SQLITE_DBCONFIG_WRITABLE_SCHEMA, tolerant ? 1 : 0, nullptr);
+  return connection.readInteger("SELECT count(*) FROM sqlite_schema").error;
+}
+
+// In a directory that can't be written to there can be no index of a log; without a log the file is all there is. One
+// that was cut, or whose schema nobody else would take, is looked at as far as it goes; `damage` tells then.
+Status open(Connection& connection, const std::filesystem::path& file, std::string& damage) {
   std::error_code ignored;
   if (!std::filesystem::exists(file, ignored)) return Error{SQLITE_CANTOPEN, "there is no file " + file.string()};
-  Status error = connection.errorOf(connection.open(file.string(), SQLITE_OPEN_READONLY));
-  if (error.ok()) {
-    sqlite3_busy_timeout(connection.handle(), kBusyMilliseconds);
-    // A file that was cut is looked at as far as it goes.
-    sqlite3_db_config(connection.handle(), SQLITE_DBCONFIG_WRITABLE_SCHEMA, 1, nullptr);
-    error = connection.readInteger("SELECT count(*) FROM sqlite_schema").error;
+  Status error = openAs(connection, file.string(), false);
+  if (error.failed() && remedyFor(error->code) == Remedy::SetAside) {
+    damage = error->text;
+    error = openAs(connection, file.string(), true);
   }
   const auto kind = error.failed() ? error->code & 0xFF : 0;
   if ((kind == SQLITE_CANTOPEN || kind == SQLITE_READONLY) &&
@@ -38,11 +46,11 @@ Status open(Connection& connection, const std::filesystem::path& file) {
 Result<StoreReport> inspectStore(const std::filesystem::path& file) {
   Connection connection;
   StoreReport report;
-  if (auto error = open(connection, file); error.failed()) return {{}, error};
+  if (auto error = open(connection, file, report.damage); error.failed()) return {{}, error};
   if (auto error = connection.errorOf(connection.run("BEGIN")); error.failed()) return {{}, error};
   if (auto error = checkPages(connection); error.failed()) {
     if (remedyFor(error->code) != Remedy::SetAside) return {{}, error};
-    report.damage = error->text;
+    report.damage = report.damage.empty() ? error->text : report.damage;
   }
   // No checksum holds the text that makes the tables what they are.
   bool hasState = false;

@@ -25,6 +25,7 @@ MOST_TOLD = 12
 # Name, module, and what it does to the service.
 CAMPAIGNS = {
     "kills": ("kills", "SIGKILL at random moments under load: committed, settled and older messages are there, once"),
+    "stalls": ("stalls", "synchronisations that take half a second, then SIGKILL: only what came in meanwhile is lost"),
     "syscalls": ("syscalls", "each system call of store, start and socket fails once or is short: the account closes"),
     "allocations": ("allocations", "each allocation of twenty scenarios fails once: the service lives and serves"),
     "bits": ("bits", "flipped bits, cut, zeroed and swapped pages of every file: seen or harmless"),

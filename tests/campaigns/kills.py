@@ -52,13 +52,13 @@ def one_kill(context, figures, service, keys, row):
     return look(context, figures, service, (senders, watcher, ended), row)
 
 
-def look(context, figures, service, load, row):
+def look(context, figures, service, load, row, patience=0.2):
     senders, watcher, ended = load
     with service.connect() as client:
         settled(client)
     reader = service.reader()
     rows = rows_after(reader, row)
-    verdict = judge([(client, number) for _, client, number in rows], senders, watcher.seen, ended)
+    verdict = judge([(client, number) for _, client, number in rows], senders, watcher.seen, ended, patience)
     reader.close()
     figures["answered"] += verdict.answered
     figures["rows"] += verdict.rows

@@ -58,6 +58,15 @@ class Shims(unittest.TestCase):
         self.page.let_all_work()
         self.assertEqual(self.run_with("faults", text), ["done", "done"])
 
+    def test_delay_one_synchronisation(self):
+        self.page[control.SYNC_DELAY] = 300
+        path = os.path.join(self.folder, "file")
+        text = f"import os, time; f = os.open({path!r}, os.O_WRONLY | os.O_CREAT); begun = time.monotonic()\n" \
+               "os.fdatasync(f); print(time.monotonic() - begun); os.fdatasync(f)"
+        took, = map(float, self.run_with("faults", text))
+        self.assertGreaterEqual(took, 0.3)
+        self.assertEqual((self.page[control.SYNC_DELAY], self.page[control.DELAYS]), (0, 1))
+
     def test_fail_one_allocation(self):
         self.page[control.FAILING_ALLOCATION] = control.COUNT_ONLY
         self.assertEqual(self.run_with("allocations", "print('alive')"), ["alive"])

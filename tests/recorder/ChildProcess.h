@@ -1,23 +1,31 @@
 // ChildProcess: runs a piece of a test in a process of its own, where limits and rights may be changed or the end may
-// come at any moment.
+// come at any moment. It ends with the test's process at the latest.
+//
+// It is begun before there is another thread: a lock that one holds at that moment, SQLite's own among them, would stay
+// locked in the child for ever.
 #pragma once
 
 #include <gtest/gtest.h>
+#include <sys/prctl.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <csignal>
 #include <filesystem>
 #include <functional>
+#include <iterator>
+
+#include "tests/support/HeapUse.h"
 
 namespace tarn::recorder {
 
 class ChildProcess {
  public:
-  explicit ChildProcess(const std::function<void()>& body) : id_(::fork()) {
+  explicit ChildProcess(const std::function<void()>& body) : id_(forkAlone()) {
     if (id_ == 0) {
+      ::prctl(PR_SET_PDEATHSIG, SIGKILL);
       body();
-      ::_exit(testing::Test::HasFailure() ? 1 : 0);
+      ::_exit(::testing::Test::HasFailure() ? 1 : 0);
     }
   }
   ~ChildProcess() {
@@ -41,6 +49,13 @@ class ChildProcess {
   }
 
  private:
+  static pid_t forkAlone() {
+#ifndef TARN_SANITIZED_HEAP  // a sanitizer may have a thread of its own
+    EXPECT_EQ(std::distance(std::filesystem::directory_iterator("/proc/self/task"), {}), 1);
+#endif
+    return ::fork();
+  }
+
   pid_t id_;
 };
 

@@ -14,6 +14,7 @@ using Fault = FaultyFiles::Fault;
 struct File {
   sqlite3_file base;
   FaultyFiles* owner;
+  bool isDatabase;
 };
 
 File& ours(sqlite3_file* file) {
@@ -34,6 +35,7 @@ int codeOf(Call call, Fault fault) {
     case Call::Write:
       return fault == Fault::InputOutput ? SQLITE_IOERR_WRITE : SQLITE_FULL;
     case Call::Sync:
+    case Call::SyncOfDatabase:
       return SQLITE_IOERR_FSYNC;
     case Call::Truncate:
       return SQLITE_IOERR_TRUNCATE;
@@ -91,7 +93,12 @@ constexpr sqlite3_io_methods kMethods{
     [](sqlite3_file* file, sqlite3_int64 size) {
       return judged<Call::Truncate>(file, real(file)->pMethods->xTruncate, size);
     },
-    [](sqlite3_file* file, int flags) { return judged<Call::Sync>(file, real(file)->pMethods->xSync, flags); },
+    [](sqlite3_file* file, int flags) {
+      if (ours(file).isDatabase) {
+        static_cast<void>(ours(file).owner->judge(Call::SyncOfDatabase));
+      }
+      return judged<Call::Sync>(file, real(file)->pMethods->xSync, flags);
+    },
     [](sqlite3_file* file, sqlite3_int64* size) {
       return judged<Call::Size>(file, real(file)->pMethods->xFileSize, size);
     },
@@ -119,6 +126,7 @@ int openFile(sqlite3_vfs* files, const char* name, sqlite3_file* file, int flags
   FaultyFiles& owner = ownerOf(files);
   ours(file).base.pMethods = nullptr;
   ours(file).owner = &owner;
+  ours(file).isDatabase = (flags & SQLITE_OPEN_MAIN_DB) != 0;
   const auto verdict = owner.judge(Call::Open);
   if (verdict.fails) return codeOf(Call::Open, verdict.fault);
   const int code = owner.real()->xOpen(owner.real(), name, real(file), flags, flagsOut);
@@ -131,7 +139,8 @@ int openFile(sqlite3_vfs* files, const char* name, sqlite3_file* file, int flags
 }  // namespace
 
 std::string FaultyFiles::nameOf(Call call) {
-  constexpr std::array kNames{"Open", "Read", "Write", "Sync", "Truncate", "Size", "ShmMap", "ShmLock"};
+  constexpr std::array kNames{"Open", "Read",   "Write",   "Sync",          "Truncate",
+                              "Size", "ShmMap", "ShmLock", "SyncOfDatabase"};
   return kNames[static_cast<std::size_t>(call)];
 }
 
@@ -181,8 +190,30 @@ bool FaultyFiles::hasFailed() const {
   return failed_;
 }
 
-FaultyFiles::Verdict FaultyFiles::judge(Call call) {
+void FaultyFiles::stall(Call call) {
   const std::lock_guard lock(mutex_);
+  stalls_ = true;
+  stalling_ = call;
+}
+
+void FaultyFiles::letGo() {
+  const std::lock_guard lock(mutex_);
+  stalls_ = false;
+  goesOn_.notify_all();
+}
+
+bool FaultyFiles::isStalled() const {
+  const std::lock_guard lock(mutex_);
+  return stalled_;
+}
+
+FaultyFiles::Verdict FaultyFiles::judge(Call call) {
+  std::unique_lock lock(mutex_);
+  if (stalls_ && call == stalling_) {
+    stalled_ = true;
+    goesOn_.wait(lock, [this] { return !stalls_; });
+    stalled_ = false;
+  }
   if (!armed_ || call != call_) return {};
   if (until_ > 0) {
     --until_;

@@ -1,5 +1,6 @@
 // FaultyFiles: files for SQLite whose n-th call of a kind fails once, or so many times, as a disk or a short memory
-// would make it fail. While one lives it stands between SQLite and the real files, for every connection that is opened.
+// would make it fail, or is held up. While one lives it stands between SQLite and the real files, for every connection
+// that is opened.
 //
 //   FaultyFiles files;
 //   files.fail(FaultyFiles::Call::Sync, 3, FaultyFiles::Fault::InputOutput);
@@ -10,6 +11,7 @@
 #include <sqlite3.h>
 
 #include <array>
+#include <condition_variable>
 #include <cstddef>
 #include <mutex>
 #include <string>
@@ -18,7 +20,8 @@ namespace tarn::recorder {
 
 class FaultyFiles {
  public:
-  enum class Call { Open, Read, Write, Sync, Truncate, Size, ShmMap, ShmLock };
+  // The last is a Sync too; it is for stall() alone.
+  enum class Call { Open, Read, Write, Sync, Truncate, Size, ShmMap, ShmLock, SyncOfDatabase };
   enum class Fault {
     InputOutput,
     NoSpace,
@@ -38,9 +41,14 @@ class FaultyFiles {
   // Controls. From now on the `ordinal`-th call of this kind fails, counted from 1, and those right after it.
   void fail(Call call, int ordinal, Fault fault, int times = 1);
   void heal();
+  // From now on the next call of this kind doesn't come back until it is let go.
+  void stall(Call call);
+  void letGo();
 
   // Observations: whether any call has failed since fail().
   bool hasFailed() const;
+  // Whether a call is held up now.
+  bool isStalled() const;
 
   // For the files themselves: what this call is to do.
   struct Verdict {
@@ -58,6 +66,10 @@ class FaultyFiles {
   int until_ = 0;  // calls that still pass
   int times_ = 0;
   bool failed_ = false;
+  bool stalls_ = false;
+  Call stalling_ = Call::Open;
+  bool stalled_ = false;
+  std::condition_variable goesOn_;
   sqlite3_vfs* real_;
   sqlite3_vfs own_;
 };

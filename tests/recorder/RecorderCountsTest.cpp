@@ -1,5 +1,6 @@
 // What a run that was killed had been handed and didn't commit is known to the next one, to the event.
 #include "tests/recorder/ChildProcess.h"
+#include "tests/recorder/FaultyFiles.h"
 #include "tests/recorder/RecorderFixture.h"
 
 namespace tarn::recorder {
@@ -99,7 +100,7 @@ TEST_F(RecorderCounts, CountsThatAreCutWhileRunningEndNothing) {
   EXPECT_EQ(lostBefore(), 3U);
 }
 
-using RecorderWindow = RecorderFixture;
+using RecorderWindow = RecorderCounts;
 
 TEST_F(RecorderWindow, IsFullOnceTheOldestEventHasWaitedTooLong) {
   gatherForLong();
@@ -116,6 +117,52 @@ TEST_F(RecorderWindow, IsFullOnceTheOldestEventHasWaitedTooLong) {
   ASSERT_TRUE(flush());
   EXPECT_TRUE(eventually([&] { return calls == 1; }));
   EXPECT_FALSE(recorder_->isFull());
+}
+
+// What comes in while the disk stalls is bounded by the time that the first of it has waited.
+TEST_F(RecorderWindow, ASynchronisationThatStallsClosesTheGateUntilItIsOver) {
+  FaultyFiles files;
+  options_.oldestWaiting = std::chrono::milliseconds(20);
+  recorder_ = std::make_unique<Recorder>(options_, log_, clock_);
+  std::atomic<int> calls{0};
+  recorder_->setRoomHandler([&] { ++calls; });
+  recorder_->start();
+  recorder_->waitUntilOpened();
+  files.stall(FaultyFiles::Call::Sync);
+  record("is written and waits for the disk");
+  EXPECT_TRUE(eventually([&] { return files.isStalled(); }));
+  EXPECT_TRUE(eventually([&] { return recorder_->isFull(); }));
+  record("came in all the same");
+  EXPECT_EQ(recorder_->counters().waiting, 2U);
+  EXPECT_EQ(calls, 0);
+  files.letGo();
+  ASSERT_TRUE(flush());
+  EXPECT_TRUE(eventually([&] { return calls == 1; }));
+  EXPECT_FALSE(recorder_->isFull());
+  EXPECT_EQ(errors(), 0U);
+}
+
+TEST_F(RecorderWindow, AKillWhileTheDiskStallsCostsWhatCameInMeanwhileToTheEvent) {
+  ChildProcess child([this] {
+    FaultyFiles files;
+    start().waitUntilOpened();
+    recordMany(50);
+    ASSERT_TRUE(flush());
+    files.stall(FaultyFiles::Call::Sync);
+    recordMany(7);
+    ASSERT_TRUE(eventually([&] { return files.isStalled(); }));
+    recordMany(5);
+    ::_exit(0);
+  });
+  ASSERT_EQ(child.wait(), 0);
+  const std::uint64_t lost = lostBefore();
+  stop();
+  // What was written and not synchronised may be in: the disk didn't lose it this time.
+  const std::uint64_t held = std::stoull(askOne(file(), "SELECT count(*) FROM events WHERE name <> 'next'"));
+  EXPECT_EQ(held + lost, 62U);
+  EXPECT_GE(held, 50U);
+  EXPECT_LE(held, 57U);
+  EXPECT_EQ(askOne(file(), "SELECT count(DISTINCT id) = max(id) FROM events"), "1");
 }
 
 TEST_F(RecorderWindow, ALoneEventIsCommittedWithinMilliseconds) {

@@ -25,6 +25,8 @@ enum class Word : std::size_t {
   Allocations = 7,        // allocations counted
   ClockOffset = 8,        // nanoseconds that the wall clock is ahead of the real one, signed
   Sequence = 9,           // entries of the journal of writes
+  SyncDelay = 10,         // milliseconds that the next synchronisation takes longer; taken back by it
+  Delays = 11,            // synchronisations that were delayed
   FirstCounter = 16,      // calls of each kind
 };
 

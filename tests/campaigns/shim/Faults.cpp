@@ -1,6 +1,7 @@
 // Faults: counts the system calls of a program by kind, and lets one of them fail or do half of what it should, or all
 // of some kinds fail for a while. What to do stands in the control page.
 #include <fcntl.h>
+#include <poll.h>
 #include <sys/epoll.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
@@ -73,6 +74,16 @@ bool failsOrShortens(Kind kind, std::size_t& size) noexcept {
     errno = static_cast<int>(action);
   }
   return action != 0;
+}
+
+// A disk that has other things to do for a while.
+void delaySync() noexcept {
+  Words* const words = controlWords();
+  if (words == nullptr) return;
+  const std::uint64_t milliseconds = word(words, Word::SyncDelay).exchange(0);
+  if (milliseconds == 0) return;
+  word(words, Word::Delays).fetch_add(1);
+  ::poll(nullptr, 0, static_cast<int>(milliseconds));
 }
 
 bool wantsMode(int flags) noexcept {
@@ -183,12 +194,14 @@ ssize_t tarnPWrite64(int file, const void* data, std::size_t size, off64_t at) {
 int tarnSync(int file) __asm__("fsync");
 int tarnSync(int file) {
   static const auto next = nextFunction<int(int)>("fsync");
+  delaySync();
   return fails(Kind::Sync) ? -1 : next(file);
 }
 
 int tarnDataSync(int file) __asm__("fdatasync");
 int tarnDataSync(int file) {
   static const auto next = nextFunction<int(int)>("fdatasync");
+  delaySync();
   return fails(Kind::Sync) ? -1 : next(file);
 }
 
