@@ -99,6 +99,7 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
     return CommitPoint{counters.handedOver, counters.committed, workQueues_.unfinished() == 0};
   });
   connections_.gate.setPauseSource([this] { return recorder_.isFull() || workQueues_.isFull(); });
+  connections_.gate.setCrowdSource([this] { return recorder_.isCrowded(); });
   loop_.addTurnHook([this] { lookForTheEnd(); });
   if (recorderEnabled_) {
     // What was sent may still be on its way through the workers' own queues.

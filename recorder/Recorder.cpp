@@ -69,9 +69,7 @@ void Recorder::record(std::string_view backend, std::string_view name, plist::Di
       // While a group is gathered the writer looks by itself; it is called only to begin one, or for a large one.
       wake = std::exchange(asleep_, false) || incoming_.size() == options_.groupEvents ||
              (before < options_.groupBytes && incoming_.bytes() >= options_.groupBytes);
-      if (handedOver_ - committed_ - failed_ >= options_.highWaterEvents || waitingBytes_ >= options_.highWaterBytes) {
-        full_.store(true, std::memory_order_relaxed);
-      }
+      noteUse();
     }
   }
   if (wake) {
@@ -79,6 +77,15 @@ void Recorder::record(std::string_view backend, std::string_view name, plist::Di
   }
   if (refused) {
     log_.error("recorder is not running; the events handed over now are lost");
+  }
+}
+
+void Recorder::noteUse() noexcept {
+  const std::uint64_t waiting = handedOver_ - committed_ - failed_;
+  if (waiting < options_.highWaterEvents * 3 / 4 && waitingBytes_ < options_.highWaterBytes * 3 / 4) return;
+  crowded_.store(true, std::memory_order_relaxed);
+  if (waiting >= options_.highWaterEvents || waitingBytes_ >= options_.highWaterBytes) {
+    full_.store(true, std::memory_order_relaxed);
   }
 }
 
@@ -315,8 +322,9 @@ void Recorder::account(std::size_t events, std::size_t bytes) {
   }
   done_.notifyAll();
   answerSettled();
-  if (full_.load(std::memory_order_relaxed) && hasRoom()) {
+  if ((full_.load(std::memory_order_relaxed) || isCrowded()) && hasRoom()) {
     full_.store(false, std::memory_order_relaxed);
+    crowded_.store(false, std::memory_order_relaxed);
     if (roomHandler_) {
       mutex_.unlock();
       roomHandler_();

@@ -54,7 +54,7 @@ class Recorder {
   Recorder(const Recorder&) = delete;
   Recorder& operator=(const Recorder&) = delete;
 
-  // Called on the writer thread each time isFull() has become false again. Set before start().
+  // Called on the writer thread each time isFull() or isCrowded() has become false again. Set before start().
   void setRoomHandler(RoomHandler handler) { roomHandler_ = std::move(handler); }
   void start();
   // Waits, once started, until the first attempt to open the file is over, which takes longest with a large file, as it
@@ -71,6 +71,8 @@ class Recorder {
               double time);
   // Whether events should not be brought in for now: too many wait, or the oldest for too long. Threads: any.
   bool isFull() noexcept;
+  // Whether it will soon be full, if those that bring in most go on. Threads: any.
+  bool isCrowded() const noexcept { return crowded_.load(std::memory_order_relaxed); }
   // All counters of one moment. Threads: any.
   RecorderCounters counters() const;
   // Commits what was handed over before the call without waiting for company. Whether all of it is committed; false
@@ -101,6 +103,7 @@ class Recorder {
   bool writeCurrent() TARN_REQUIRES(mutex_);
   bool maintain() TARN_REQUIRES(mutex_);
   bool verify() TARN_REQUIRES(mutex_);
+  void noteUse() noexcept TARN_REQUIRES(mutex_);
   void noteOldest() TARN_REQUIRES(mutex_);
   bool hasRoom() const TARN_REQUIRES(mutex_);
   void account(std::size_t events, std::size_t bytes) TARN_REQUIRES(mutex_);
@@ -125,6 +128,7 @@ class Recorder {
   std::optional<HandOverCounts> left_;  // by the run before, until its loss is told
 
   std::atomic<bool> full_{false};
+  std::atomic<bool> crowded_{false};
   // Of the oldest event that waits, in the steady clock's ticks; 0 when none does.
   std::atomic<TimePoint::rep> oldestSince_{0};
   mutable Mutex mutex_;

@@ -34,8 +34,8 @@ struct RecorderOptions {
   std::size_t groupEvents = 4096;
   std::size_t groupBytes = std::size_t{4} << 20;
 
-  // Waiting events: from the high marks on isFull() is true, until both low marks are reached. They are low enough for
-  // what waits to be written within the time that a crash may cost.
+  // Waiting events: from the high marks on isFull() is true, from three quarters of them on isCrowded(), until both low
+  // marks are reached. They are low enough for what waits to be written within the time that a crash may cost.
   std::size_t highWaterEvents = 16'384;
   std::size_t lowWaterEvents = 8'192;
   std::size_t highWaterBytes = std::size_t{16} << 20;

@@ -10,7 +10,7 @@ namespace tarn {
 namespace {
 
 // IDs that are listed in a unit of cost.
-constexpr std::size_t kListedAtOnce = 64;
+constexpr std::size_t kListedAtOnce = 16;
 
 }  // namespace
 
@@ -35,7 +35,6 @@ void TarnReportingSessionListing::proceed(const std::weak_ptr<TarnReportingServi
       return;
     }
   }
-  TarnReportingSpend(reporters_.size() / kListedAtOnce);  // what the reply takes
   reply_(std::nullopt, std::move(reporters_));
 }
 

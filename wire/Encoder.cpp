@@ -193,13 +193,20 @@ void Encoder::reply(std::uint64_t id, std::initializer_list<plist::ValueView> re
   endFrame(header);
 }
 
-void Encoder::replyWithNumbers(std::uint64_t id, std::span<const std::int64_t> numbers) {
+void Encoder::replyWithNumbers(std::uint64_t id, std::size_t count, std::string_view encoded) {
   const std::size_t header = beginFrame();
   appendHead(out_, Major::Array, 3);
   appendHead(out_, Major::Unsigned, id);
   out_.push_back(kNull);
-  appendNumbers(out_, numbers);
+  appendHead(out_, Major::Array, count);
+  out_.append(encoded);
   endFrame(header);
+}
+
+void Encoder::numbers(std::span<const std::int64_t> numbers) {
+  for (const std::int64_t number : numbers) {
+    appendSigned(out_, number);
+  }
 }
 
 void Encoder::errorReply(std::uint64_t id, std::string_view domain, std::int64_t code, std::string_view text) {

@@ -32,8 +32,9 @@ class Encoder {
   void request(std::uint64_t id, const Request& request);
   // One frame each: [id, null, results...] and [id, [domain, code, text]].
   void reply(std::uint64_t id, std::initializer_list<plist::ValueView> results = {});
-  // The result is one array of these numbers.
-  void replyWithNumbers(std::uint64_t id, std::span<const std::int64_t> numbers);
+  // The result is one array of so many numbers, which numbers() has made bytes of, in one call or in several.
+  void replyWithNumbers(std::uint64_t id, std::size_t count, std::string_view encoded);
+  void numbers(std::span<const std::int64_t> numbers);
   // A text that isn't UTF-8 is mended: each wrong byte becomes U+FFFD.
   void errorReply(std::uint64_t id, std::string_view domain, std::int64_t code, std::string_view text);
 

@@ -5,6 +5,8 @@
 // done in slices at its next slice; accepting, `status` at the head of other connections and signals go on. Nothing is
 // lost: what is not read waits in the sockets, and so clients are slowed.
 //
+// Before it comes to that, it may be crowded: then those that made it so stop first, and the others go on.
+//
 // Owned by ConnectionHost. Threads: the main loop's.
 #pragma once
 
@@ -26,7 +28,12 @@ class ConnectionGate {
   // Asked for every request: must be cheap. Whoever answers true wakes the queue when that ends.
   void setPauseSource(platform::UniqueFunction<bool()> shouldPause) { shouldPause_ = std::move(shouldPause); }
 
+  // Asked likewise: whether there is little room left.
+  void setCrowdSource(platform::UniqueFunction<bool()> isCrowded) { isCrowded_ = std::move(isCrowded); }
+
   bool open() { return loop_.queue()->ready() < maxQueuedWork_ && !loop_.waits() && !(shouldPause_ && shouldPause_()); }
+
+  bool crowded() { return isCrowded_ && isCrowded_(); }
 
   // Connections that stopped at a request; each tells when it stops and when it goes on or ends.
   void countHeld() noexcept { ++held_; }
@@ -37,6 +44,7 @@ class ConnectionGate {
   const MainLoop& loop_;
   std::size_t maxQueuedWork_;
   platform::UniqueFunction<bool()> shouldPause_;
+  platform::UniqueFunction<bool()> isCrowded_;
   std::size_t held_ = 0;
 };
 

@@ -9,6 +9,7 @@
 
 #include "host/loop/MainLoop.h"
 #include "host/ring/RingBoard.h"
+#include "host/socket/ConnectionEnds.h"
 #include "host/socket/ConnectionGate.h"
 #include "host/socket/FairShares.h"
 #include "host/socket/HalfFrames.h"
@@ -42,7 +43,7 @@ class ConnectionHost {
         gate(mainLoop, hostLimits.maxQueuedWork),
         halfFrames(hostLimits.halfFrameTime, hostLimits.quotas.waitingBytes),
         rings(mainLoop, logSink) {
-    loop.queue()->setPauseSource([this] { return !gate.open(); });
+    loop.queue()->setPauseSource([this] { return !takesFrom(shares.served()); });
     loop.addTurnHook([this] { serveShares(); });
   }
   ConnectionHost(const ConnectionHost&) = delete;
@@ -70,11 +71,18 @@ class ConnectionHost {
   // is destroyed uncalled when it never will be. Without one there is nothing to commit.
   void setSettleSource(SettleSource source) { settle_ = std::move(source); }
   void settle(platform::Work done) {
-    if (settle_) {
-      settle_(std::move(done));
-    } else {
-      done();
-    }
+    ends.afterThese([this, done = std::move(done)]() mutable {
+      if (settle_) {
+        settle_(std::move(done));
+      } else {
+        done();
+      }
+    });
+  }
+
+  // Whether requests of this user may be taken now, and its long work may go on; null: of one that isn't known.
+  bool takesFrom(const ShareParty* party) {
+    return gate.open() && (party == nullptr || !gate.crowded() || !shares.isHeavy(*party));
   }
 
   // Looks after half frames as long as there are some.
@@ -104,6 +112,7 @@ class ConnectionHost {
   Ledger ledger;
   ConnectionGate gate;
   FairShares shares;
+  ConnectionEnds ends;
   HalfFrames halfFrames;
   RingBoard rings;
   // One for all connections: it keeps nothing between frames but scratch space and the key lists seen lately.
@@ -121,8 +130,8 @@ class ConnectionHost {
   static constexpr int kLooksAtHalfFrames = 8;
 
   void serveShares() {
-    const bool more =
-        shares.serve(ledger.connectionsOpen > 1 ? kCostPerTurn : kCostPerTurnAlone, [this] { return gate.open(); });
+    const bool more = shares.serve(ledger.connectionsOpen > 1 ? kCostPerTurn : kCostPerTurnAlone,
+                                   [this](const ShareParty& party) { return takesFrom(&party); });
     if (more) {
       loop.queue()->wake();
     }

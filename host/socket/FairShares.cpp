@@ -40,7 +40,7 @@ std::int64_t FairShares::serveOne() {
   const std::shared_ptr<ShareParty> party = parties_.front();
   if (party->credit <= 0) {
     party->credit += kQuantum;
-    std::rotate(parties_.begin(), parties_.begin() + 1, parties_.end());
+    passOver();
     return parties_.size() == 1 ? 0 : 1;
   }
   const bool takesFresh = !party->fresh.empty() && (party->seats.empty() || party->freshTurns < kFreshTurns);
@@ -54,7 +54,8 @@ std::int64_t FairShares::serveOne() {
     return 1;
   }
   holder->queued_ = false;  // what comes for it while it is served counts as more
-  const ShareHolder::Turn turn = holder->takeTurn(holder->credit_);
+  const ShareHolder::Turn turn = serve(*party, *holder);
+  noteDone(*party, turn.cost);
   holder->credit_ = std::max(holder->credit_ - turn.cost, -kMostDebt);
   party->credit = std::max(party->credit - turn.cost, -kMostDebt);
   if (turn.more && !std::exchange(holder->queued_, true)) {
@@ -65,6 +66,38 @@ std::int64_t FairShares::serveOne() {
     parties_.erase(std::find(parties_.begin(), parties_.end(), party));
   }
   return std::max<std::int64_t>(turn.cost, 1);
+}
+
+ShareHolder::Turn FairShares::serve(const ShareParty& party, ShareHolder& holder) {
+  struct Served {
+    explicit Served(const ShareParty*& theOne) : one(theOne) {}
+    Served(const Served&) = delete;
+    Served& operator=(const Served&) = delete;
+    ~Served() { one = nullptr; }
+    const ShareParty*& one;
+  };
+  const Served served(served_ = &party);
+  return holder.takeTurn(holder.credit_);
+}
+
+void FairShares::passOver() {
+  std::rotate(parties_.begin(), parties_.begin() + 1, parties_.end());
+}
+
+std::int64_t FairShares::latelyOf(const ShareParty& party) const noexcept {
+  return party.lately >> std::min<std::uint64_t>(fading_ - party.fading, 62);
+}
+
+void FairShares::noteDone(ShareParty& party, std::int64_t cost) noexcept {
+  party.lately = latelyOf(party) + cost;
+  party.fading = fading_;
+  lately_ += cost;
+  sinceFading_ += cost;
+  if (sinceFading_ >= kFadingCost) {
+    sinceFading_ = 0;
+    lately_ /= 2;
+    ++fading_;
+  }
 }
 
 void FairShares::finishWork() {

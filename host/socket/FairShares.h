@@ -12,6 +12,8 @@
 // it is served on and on. Who comes back and owes nothing is served ahead of the user's others, so that a request now
 // and then doesn't wait for a thousand connections that are busy all the time; every few turns one of those is served.
 //
+// What a user took of what was done lately is remembered, so that who took much waits first when room gets scarce.
+//
 // Owned by ConnectionHost. Threads: the main loop's.
 #pragma once
 
@@ -20,6 +22,7 @@
 #include <deque>
 #include <memory>
 #include <unordered_map>
+#include <utility>
 
 namespace tarn::linux_host {
 
@@ -41,6 +44,10 @@ struct ShareParty {
   std::size_t sessions = 0;
   std::size_t waitingBytes = 0;
   MessageRate rate;
+
+  // Cost of what was done for it lately, as of the fading that was the latest then.
+  std::int64_t lately = 0;
+  std::uint64_t fading = 0;
 
   std::int64_t credit = 0;
   bool queued = false;
@@ -87,6 +94,10 @@ class FairShares {
   static constexpr std::int64_t kMostDebt = 64 * kQuantum;
   // Turns of those that came back, after which one of the others is served.
   static constexpr int kFreshTurns = 4;
+  // What was done lately counts half as much after each time that so much was done by all.
+  static constexpr std::int64_t kFadingCost = 16384;
+  // Who took more than this part of it is heavy.
+  static constexpr std::int64_t kHeavyPart = 4;
 
   FairShares() = default;
   FairShares(const FairShares&) = delete;
@@ -96,17 +107,27 @@ class FairShares {
   std::shared_ptr<ShareParty> partyOf(std::uint32_t user);
   // Something came for the holder to do. Cheap when it waits for a turn already.
   void ready(const std::shared_ptr<ShareHolder>& holder);
-  // Gives turns until they cost `budget` or more, or nobody has anything to do. `isOpen` is asked before each turn.
-  // Whether somebody is left who could go on at once.
-  template <class IsOpen>
-  bool serve(std::int64_t budget, IsOpen isOpen) {
-    while (!parties_.empty()) {
-      if (!isOpen()) return false;
+  // Gives turns until they cost `budget` or more, or nobody has anything to do. `mayServe(party)` is asked before each
+  // turn of a user. Whether somebody is left who could go on at once.
+  template <class MayServe>
+  bool serve(std::int64_t budget, MayServe mayServe) {
+    std::size_t passedOver = 0;
+    while (passedOver < parties_.size()) {
+      if (!mayServe(std::as_const(*parties_.front()))) {
+        passOver();
+        ++passedOver;
+        continue;
+      }
       if (budget <= 0) return true;
+      passedOver = 0;
       budget -= serveOne();
     }
     return false;
   }
+  // Whose turn it is; null between turns.
+  const ShareParty* served() const noexcept { return served_; }
+  // Whether more than a part of what was done lately was done for this user.
+  bool isHeavy(const ShareParty& party) const noexcept { return latelyOf(party) * kHeavyPart > lately_; }
   // Lets everybody finish what was begun.
   void finishWork();
   // Calls visit(party) for each user that has connections, in no order.
@@ -121,9 +142,17 @@ class FairShares {
 
  private:
   std::int64_t serveOne();
+  ShareHolder::Turn serve(const ShareParty& party, ShareHolder& holder);
+  void passOver();
+  std::int64_t latelyOf(const ShareParty& party) const noexcept;
+  void noteDone(ShareParty& party, std::int64_t cost) noexcept;
 
   std::deque<std::shared_ptr<ShareParty>> parties_;  // the one whose visit it is comes first
   std::unordered_map<std::uint32_t, std::weak_ptr<ShareParty>> byUser_;
+  const ShareParty* served_ = nullptr;
+  std::int64_t lately_ = 0;  // of all users together
+  std::int64_t sinceFading_ = 0;
+  std::uint64_t fading_ = 0;
 };
 
 }  // namespace tarn::linux_host

@@ -6,6 +6,7 @@
 #include <utility>
 
 #include "host/socket/Ledger.h"
+#include "host/socket/NumbersReply.h"
 #include "wire/Encoder.h"
 
 namespace tarn::linux_host {
@@ -22,8 +23,8 @@ void ReplyOutput::append(std::uint64_t id, std::initializer_list<plist::ValueVie
   ++unsentReplies_;
 }
 
-void ReplyOutput::append(std::uint64_t id, std::span<const std::int64_t> numbers) {
-  wire::Encoder(bytes_).replyWithNumbers(id, numbers);
+void ReplyOutput::append(const NumbersReply& reply) {
+  wire::Encoder(bytes_).replyWithNumbers(reply.id(), reply.count(), reply.encoded());
   ++unsentReplies_;
 }
 

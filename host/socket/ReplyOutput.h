@@ -9,7 +9,6 @@
 #include <cstddef>
 #include <cstdint>
 #include <initializer_list>
-#include <span>
 #include <string>
 
 #include "platform/TarnReportingServiceProtocol.h"
@@ -18,6 +17,7 @@
 namespace tarn::linux_host {
 
 struct Ledger;
+class NumbersReply;
 
 class ReplyOutput {
  public:
@@ -27,7 +27,7 @@ class ReplyOutput {
   ReplyOutput& operator=(const ReplyOutput&) = delete;
 
   void append(std::uint64_t id, std::initializer_list<plist::ValueView> results);
-  void append(std::uint64_t id, std::span<const std::int64_t> numbers);
+  void append(const NumbersReply& reply);
   void append(std::uint64_t id, const platform::RemoteError& error);
   void countDropped() noexcept;
 

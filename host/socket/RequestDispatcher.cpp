@@ -71,17 +71,18 @@ struct ReplyOf<Result::Dictionary> {
 template <>
 struct ReplyOf<Result::Numbers> {
   using Type = platform::Reply<std::vector<std::int64_t>>;
-  static void send(ReplySink& sink, std::uint64_t id, const std::vector<std::int64_t>& numbers) {
-    sink.sendNumbers(id, numbers);
+  static void send(ReplySink& sink, std::uint64_t id, std::vector<std::int64_t> numbers) {
+    sink.sendNumbers(id, std::move(numbers));
   }
 };
 
 template <Result kResult>
 typename ReplyOf<kResult>::Type replyWith(ReplyTicket ticket) {
-  return
-      [ticket = std::move(ticket)](const std::optional<platform::RemoteError>& error, const auto&... results) mutable {
-        ticket.answer(error, [&](ReplySink& sink, std::uint64_t id) { ReplyOf<kResult>::send(sink, id, results...); });
-      };
+  return [ticket = std::move(ticket)](const std::optional<platform::RemoteError>& error, auto&&... results) mutable {
+    ticket.answer(error, [&](ReplySink& sink, std::uint64_t id) {
+      ReplyOf<kResult>::send(sink, id, std::forward<decltype(results)>(results)...);
+    });
+  };
 }
 
 // Calls the remote interface's operation with the arguments, and for the result, that the table names.
@@ -127,6 +128,8 @@ static_assert(std::equal(kEntries.begin(), kEntries.end(), wire::kOperations.beg
 
 // A session is made, started and stopped with a worker of each class.
 constexpr std::size_t kSessionCost = 16;
+// A message reaches its session's workers, and most of it the recorder.
+constexpr std::size_t kMessageCost = 2;
 // Bytes that are decoded and stored in a unit of cost.
 constexpr std::size_t kBytesPerCost = 1024;
 
@@ -141,6 +144,8 @@ std::size_t costOf(const wire::Request& request, std::size_t frameBytes) noexcep
     case Operation::StopReportingSessionForID:
     case Operation::DestroyReportingSession:
       return kSessionCost + bytes;
+    case Operation::SendMessage:
+      return kMessageCost + bytes;
     default:
       return 1 + bytes;
   }

@@ -8,7 +8,7 @@
 #include <initializer_list>
 #include <memory>
 #include <optional>
-#include <span>
+#include <vector>
 
 #include "platform/TarnReportingServiceProtocol.h"
 #include "plist/ValueView.h"
@@ -21,7 +21,7 @@ class ReplySink {
  public:
   virtual ~ReplySink() = default;
   virtual void sendReply(std::uint64_t id, std::initializer_list<plist::ValueView> results) = 0;
-  virtual void sendNumbers(std::uint64_t id, std::span<const std::int64_t> numbers) = 0;
+  virtual void sendNumbers(std::uint64_t id, std::vector<std::int64_t> numbers) = 0;
   virtual void sendError(std::uint64_t id, const platform::RemoteError& error) = 0;
   // A second reply to one request came; the first went out.
   virtual void dropReply() = 0;

@@ -22,8 +22,12 @@ constexpr std::size_t kGatheredReplyBytes = 4096;
 constexpr int kMostFlushesPutOff = 8;
 // Received bytes in a unit of cost.
 constexpr std::size_t kReceivedBytesPerCost = 8192;
-// Of an answer to `status`.
-constexpr std::size_t kStatusCost = 16;
+// Of an answer to `status`, and of the end of a connection.
+constexpr std::size_t kStatusCost = 24;
+constexpr std::size_t kEndCost = 24;
+// Numbers of a reply that are encoded at once, and in a unit of cost.
+constexpr std::size_t kNumbersAtOnce = 2048;
+constexpr std::size_t kNumbersPerCost = 128;
 
 ucred peerOf(const UniqueDescriptor& socket) {
   ucred peer{.pid = 0, .uid = static_cast<uid_t>(-1), .gid = static_cast<gid_t>(-1)};
@@ -90,8 +94,11 @@ void SocketConnection::handleEvents(std::uint32_t events) {
     flush();
   }
   if (state_ != State::Open || (events & (EPOLLIN | EPOLLHUP | EPOLLERR)) == 0) return;
-  peerGone_ = peerGone_ || (events & EPOLLHUP) != 0;
-  if (host_.gate.open()) {
+  if ((events & EPOLLHUP) != 0) {
+    peerGone_ = true;
+    host_.ends.begin(end_);
+  }
+  if (host_.takesFrom(&party())) {
     inputWaits_ = true;
     host_.shares.ready(self());
   } else {
@@ -258,7 +265,7 @@ void SocketConnection::serveRequest(wire::DecodedRequest& request, std::size_t f
     serveRingOperation(request);
     return;
   }
-  if (!host_.gate.open()) {
+  if (!host_.takesFrom(&party())) {
     hold(request, frameBytes);
     return;
   }
@@ -361,13 +368,13 @@ void SocketConnection::endInput() {
   }
 }
 
-template <class Content>
-void SocketConnection::reply(std::uint64_t id, const Content& content) {
+template <class... Content>
+void SocketConnection::reply(const Content&... content) {
   if ((state_ != State::Open && state_ != State::Ending) || output_.broken()) {
     output_.countDropped();
     return;
   }
-  output_.append(id, content);
+  output_.append(content...);
   const bool waitsForRoom = (watchedEvents_ & EPOLLOUT) != 0;
   if (output_.unsentBytes() > (waitsForRoom ? host_.limits.maxUnreadReplyBytes : kEarlyFlushBytes)) {
     flush();
@@ -381,8 +388,23 @@ void SocketConnection::sendReply(std::uint64_t id, std::initializer_list<plist::
   reply(id, results);
 }
 
-void SocketConnection::sendNumbers(std::uint64_t id, std::span<const std::int64_t> numbers) {
-  reply(id, numbers);
+void SocketConnection::sendNumbers(std::uint64_t id, std::vector<std::int64_t> numbers) {
+  sendRest({id, std::move(numbers)});
+}
+
+// In the connection's own line, ahead of its next request.
+void SocketConnection::sendRest(NumbersReply numbers) {
+  numbers.encode(kNumbersAtOnce);
+  if (numbers.whole()) {
+    reply(numbers);
+    return;
+  }
+  lane_.spend(kNumbersAtOnce / kNumbersPerCost);
+  const bool isTurn = WorkLane::currentOf(host_.loop.queue().get()) == &lane_;
+  host_.loop.queue()->asyncIn(lane_, [this, rest = std::move(numbers)]() mutable { sendRest(std::move(rest)); });
+  if (!isTurn) {
+    host_.shares.ready(self());
+  }
 }
 
 void SocketConnection::sendError(std::uint64_t id, const platform::RemoteError& error) {
@@ -442,6 +464,7 @@ void SocketConnection::cut(CutReason reason, const std::string& why) {
 
 void SocketConnection::beginEnd(bool interrupted) {
   state_ = interrupted ? State::Ended : State::Ending;
+  host_.ends.begin(end_);
   if (heldRequest_) {
     host_.gate.countReleased();
     heldRequest_.reset();
@@ -466,6 +489,7 @@ void SocketConnection::beginEnd(bool interrupted) {
 }
 
 void SocketConnection::finish(bool interrupted) {
+  lane_.spend(kEndCost);
   flush();
   output_.drop();
   state_ = State::Ended;
@@ -482,6 +506,8 @@ void SocketConnection::finish(bool interrupted) {
   rings_.reset();
   countSessions();
   --party().connections;
+  // After what the handlers left to be done.
+  host_.loop.queue()->asyncIn(lane_, [host = &host_, place = end_] { host->ends.finish(place); });
 }
 
 }  // namespace tarn::linux_host

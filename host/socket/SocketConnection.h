@@ -20,6 +20,7 @@
 #include "host/log/LogClient.h"
 #include "host/ring/ConnectionRings.h"
 #include "host/socket/ConnectionHost.h"
+#include "host/socket/NumbersReply.h"
 #include "host/socket/QuotaUse.h"
 #include "host/socket/ReplyOutput.h"
 #include "host/socket/RequestDispatcher.h"
@@ -66,11 +67,11 @@ class SocketConnection final : public platform::Connection,
   void endHalfFrame(const std::string& why) override;
 
   void sendReply(std::uint64_t id, std::initializer_list<plist::ValueView> results) override;
-  void sendNumbers(std::uint64_t id, std::span<const std::int64_t> numbers) override;
+  void sendNumbers(std::uint64_t id, std::vector<std::int64_t> numbers) override;
   void sendError(std::uint64_t id, const platform::RemoteError& error) override;
   void dropReply() override { output_.countDropped(); }
 
-  bool takesRingRequests() override { return object_ != nullptr && host_.gate.open(); }
+  bool takesRingRequests() override { return object_ != nullptr && host_.takesFrom(&party()); }
   void serveRingRequest(wire::DecodedRequest& request) override;
   void afterRingRequests(platform::Work work) override;
 
@@ -105,8 +106,9 @@ class SocketConnection final : public platform::Connection,
   void answerRingOperation(std::uint64_t id, plist::ValueView result, const Status& done);
 
   // Sends the reply, or counts it as dropped when nobody can get it any more.
-  template <class Content>
-  void reply(std::uint64_t id, const Content& content);
+  template <class... Content>
+  void reply(const Content&... content);
+  void sendRest(NumbersReply numbers);
   // Whether the replies had better go out with those of the next turns.
   bool gathersReplies();
 
@@ -128,6 +130,7 @@ class SocketConnection final : public platform::Connection,
   wire::FrameBuffer frames_;
   bool inputWaits_ = false;  // the socket may have bytes
   bool peerGone_ = false;    // nobody will read a reply
+  ConnectionEnds::Place end_ = 0;
   WorkLane lane_;
   std::vector<UniqueDescriptor> descriptors_;        // that came last, for openRing
   std::shared_ptr<ConnectionRings> rings_;           // once it has any

@@ -14,8 +14,8 @@ namespace tarn::linux_host {
 namespace {
 
 constexpr std::string_view kModule = "SocketListener";
-// Clients that are accepted before others have their turn.
-constexpr int kAcceptsPerTurn = 32;
+// Clients that are accepted before others have their turn: each takes as long as a dozen messages.
+constexpr int kAcceptsPerTurn = 4;
 // How long accepting rests when there is no room.
 constexpr std::chrono::milliseconds kAcceptPause{50};
 

@@ -1,12 +1,14 @@
 #!/usr/bin/env python3
 """Fault, attack and load campaigns against the real service. Each prints one line with its figures and its seed.
 
-usage: campaign.py --programs DIR --shims DIR [--list] [--seed N [--fresh]] [--brief] [--keep] [NAME|all [SECONDS]]
+usage: campaign.py --programs DIR --shims DIR [--list] [--seed N [--fresh]] [--brief] [--keep]
+                   [NAME[/PART]|all [SECONDS]]
 
-SECONDS is how long one campaign goes on (20); some end when nothing is left to try. The seed is that of TARN_TEST_SEED,
-else of --seed, else a fresh one. With --fresh a campaign goes on for half as long with a fresh seed. Exit 1 when one
-found something, with what it was and how to repeat it on stderr. --brief is for runs among other tests. --keep leaves
-the campaign's folder where it is and says where.
+PART is one of the parts of a campaign that has some, which then print a line each. SECONDS is how long one campaign
+goes on (20); some end when nothing is left to try. The seed is that of TARN_TEST_SEED, else of --seed, else a fresh
+one. With --fresh a campaign goes on for half as long with a fresh seed. Exit 1 when one found something, with what it
+was and how to repeat it on stderr. --brief is for runs among other tests. --keep leaves the campaign's folder where it
+is and says where.
 """
 
 import argparse
@@ -57,7 +59,8 @@ def fresh_seed():
 
 def figures_line(name, context, figures):
     parts = [f"{key}={value:.1f}" if isinstance(value, float) else f"{key}={value}" for key, value in figures.items()]
-    verdict = f"failed({len(context.failures)})" if context.failures else "held"
+    failures = context.failures_of_part()
+    verdict = f"failed({failures})" if failures else "held"
     return f"campaign {name} seed={context.seed} {' '.join(parts)}: {verdict}"
 
 
@@ -69,11 +72,17 @@ def tell(name, context, seconds):
     print(f"  replay: {SEED_VARIABLE}={context.seed} ./dev campaign {name} {seconds:g}", file=sys.stderr, flush=True)
 
 
-def run(name, options, seed, seconds):
+def run(name, part, options, seed, seconds):
     """Whether it held."""
     folder = tempfile.mkdtemp(prefix="tarncampaign")
     context = Context(os.path.join(options.programs, "tarnreportingd"), options.shims, folder, seconds,
                       seed, options.brief)
+    context.only = part
+
+    def tell_part(part, figures):
+        print(figures_line(f"{name}/{part}", context, figures), flush=True)
+
+    context.tell_part = tell_part
     figures = {}
     try:
         importlib.import_module(CAMPAIGNS[name][0]).run(context, figures)
@@ -85,9 +94,11 @@ def run(name, options, seed, seconds):
             print(f"  {name}: kept {folder}", file=sys.stderr)
         else:
             shutil.rmtree(folder, ignore_errors=True)
-    print(figures_line(name, context, figures), flush=True)
+    context.begin_part(whole=True)
+    if not part:
+        print(figures_line(name, context, figures), flush=True)
     if context.failures:
-        tell(name, context, seconds)
+        tell(f"{name}/{part}" if part else name, context, seconds)
     return not context.failures
 
 
@@ -115,15 +126,16 @@ def main(words):
         for name, (_, what) in CAMPAIGNS.items():
             print(f"{name:12} {what}")
         return 0
-    if options.name != "all" and options.name not in CAMPAIGNS:
+    name, _, part = options.name.partition("/")
+    if name != "all" and name not in CAMPAIGNS:
         print(f"campaign: there is no {options.name!r} (there are: {' '.join(CAMPAIGNS)})", file=sys.stderr)
         return 64
     if options.seconds <= 0:
         print("campaign: a campaign takes more than no time", file=sys.stderr)
         return 64
     raise_descriptor_limit()
-    names = CAMPAIGNS if options.name == "all" else [options.name]
-    held = [run(name, options, *each) for name in names
+    names = CAMPAIGNS if name == "all" else [name]
+    held = [run(name, part, options, *each) for name in names
             for each in runs_of(options.seed, options.fresh, options.seconds)]
     return 0 if all(held) else 1
 

@@ -4,6 +4,7 @@ import os
 import random
 import resource
 import time
+from collections.abc import Callable
 from dataclasses import dataclass, field
 
 from control import Control, shim
@@ -25,6 +26,9 @@ class Context:
     services: list = field(default_factory=list)
     begun: float = field(default_factory=time.monotonic)
     folders: int = 0
+    only: str = ""  # the part that is asked for; empty: all
+    tell_part: Callable = lambda part, figures: None
+    failed_before: int = 0
 
     def __post_init__(self):
         self.random = random.Random(self.seed)
@@ -34,6 +38,13 @@ class Context:
 
     def fail(self, text):
         self.failures.append(text)
+
+    def begin_part(self, whole=False):
+        """From here on failures are those of another part, or again of the whole."""
+        self.failed_before = 0 if whole else len(self.failures)
+
+    def failures_of_part(self):
+        return len(self.failures) - self.failed_before
 
     def new_folder(self):
         self.folders += 1

@@ -24,7 +24,7 @@ def end_with_parent():
 class Service:
     """One state directory and one socket, with at most one running service; started as often as a campaign likes."""
 
-    def __init__(self, program, folder, configuration="", environment=None, arguments=()):
+    def __init__(self, program, folder, configuration="", environment=None, arguments=(), before=lambda: None):
         self.program, self.folder = program, folder
         os.makedirs(folder, exist_ok=True)
         self.state = os.path.join(folder, "state")
@@ -33,6 +33,7 @@ class Service:
         self.configuration = os.path.join(folder, "config.toml")
         self.environment = dict(environment or {})
         self.arguments = list(arguments)
+        self.before = before  # called in the process, before it becomes the service
         self.process = None
         with open(self.configuration, "w", encoding="utf-8") as file:
             file.write(configuration)
@@ -51,9 +52,13 @@ class Service:
             self.process = subprocess.Popen(
                 [self.program, "--socket", self.socket, "--state-dir", self.state, "--config", self.configuration,
                  "--log-level", "error", *self.arguments],
-                stdin=subprocess.DEVNULL, stdout=log, stderr=log, preexec_fn=end_with_parent,
+                stdin=subprocess.DEVNULL, stdout=log, stderr=log, preexec_fn=self.prepare,
                 env={**os.environ, "NOTIFY_SOCKET": path, **self.environment, **(environment or {})})
             return self.wait_until_ready(manager, patience)
+
+    def prepare(self):
+        end_with_parent()
+        self.before()
 
     def wait_until_ready(self, manager, patience):
         begun = time.monotonic()

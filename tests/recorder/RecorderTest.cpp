@@ -268,6 +268,24 @@ TEST_F(RecorderTest, IsFullFromTheHighMarkUntilTheLowMark) {
   EXPECT_FALSE(recorder_->isFull());
 }
 
+TEST_F(RecorderTest, IsCrowdedFromThreeQuartersOfTheHighMarkUntilTheLowMark) {
+  gatherForLong();
+  options_.highWaterEvents = 12;
+  options_.lowWaterEvents = 5;
+  recorder_ = std::make_unique<Recorder>(options_, log_, clock_);
+  std::atomic<int> calls{0};
+  recorder_->setRoomHandler([&] { ++calls; });
+  recorder_->start();
+  recordMany(8);
+  EXPECT_FALSE(recorder_->isCrowded());
+  recordMany(1);
+  EXPECT_TRUE(recorder_->isCrowded());
+  EXPECT_FALSE(recorder_->isFull());
+  ASSERT_TRUE(flush());
+  EXPECT_TRUE(eventually([&] { return calls == 1; }));
+  EXPECT_FALSE(recorder_->isCrowded());
+}
+
 TEST_F(RecorderTest, BytesFillItToo) {
   gatherForLong();
   options_.highWaterBytes = 100'000;

@@ -84,7 +84,9 @@ TEST(Encoder, RepliesAreNullAndResultsBehindTheID) {
   encoder.reply(7, {true});
   encoder.reply(300);
   const std::int64_t numbers[] = {1, -1};
-  encoder.replyWithNumbers(8, numbers);
+  std::string encoded;
+  Encoder(encoded).numbers(numbers);
+  encoder.replyWithNumbers(8, 2, encoded);
   EXPECT_EQ(toHex(out),
             "04000000"
             "8307f6f5"

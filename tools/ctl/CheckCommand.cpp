@@ -7,7 +7,6 @@
 
 #include "recorder/store/StoreReport.h"
 #include "tools/ctl/Command.h"
-#include "tools/ctl/ExitStatus.h"
 #include "tools/ctl/Output.h"
 
 namespace tarn::ctl {

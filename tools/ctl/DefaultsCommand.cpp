@@ -7,7 +7,6 @@
 #include "host/settings/JsonDefaultsStore.h"
 #include "host/system/JsonValues.h"
 #include "tools/ctl/Command.h"
-#include "tools/ctl/ExitStatus.h"
 #include "tools/ctl/Output.h"
 #include "tools/ctl/SilentLog.h"
 

@@ -9,7 +9,6 @@
 #include "recorder/store/EventReader.h"
 #include "tools/ctl/Command.h"
 #include "tools/ctl/EventText.h"
-#include "tools/ctl/ExitStatus.h"
 #include "tools/ctl/Output.h"
 
 namespace tarn::ctl {
@@ -145,7 +144,7 @@ void addEventsCommand(CLI::App& app, Context& context) {
   command->add_option("--after", arguments->query.after, "Only events with greater ids")->type_name("ID");
   command->add_flag("--json", arguments->asJson, "Print one object a line: id, time, backend, name, payload, detail");
   command->add_flag("--settled", arguments->settled,
-                    "First wait until nothing waits for the service's queue or the disk any more");
+                    "First wait until all that came to the service by now is on the disk");
   command->footer(
       "\nReads the recorder in the state directory; the service need not run. --settled asks it when it does.\n\n"
       "Examples:\n"

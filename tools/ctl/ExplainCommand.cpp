@@ -12,7 +12,6 @@
 
 #include "dictionary/MessageDictionary.h"
 #include "tools/ctl/Command.h"
-#include "tools/ctl/ExitStatus.h"
 #include "tools/ctl/Output.h"
 #include "tools/ctl/SimilarNames.h"
 

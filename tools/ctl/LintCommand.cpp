@@ -10,7 +10,6 @@
 #include "dictionary/MessageDictionary.h"
 #include "host/system/SystemError.h"
 #include "tools/ctl/Command.h"
-#include "tools/ctl/ExitStatus.h"
 #include "tools/ctl/InputFile.h"
 #include "tools/ctl/MessageLint.h"
 #include "tools/ctl/Output.h"

@@ -7,7 +7,6 @@
 
 #include "host/settings/NotificationFolder.h"
 #include "tools/ctl/Command.h"
-#include "tools/ctl/ExitStatus.h"
 #include "tools/ctl/Output.h"
 
 namespace tarn::ctl {

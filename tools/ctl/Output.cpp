@@ -5,7 +5,6 @@
 
 #include "host/system/Files.h"
 #include "plist/EscapedText.h"
-#include "tools/ctl/ExitStatus.h"
 
 namespace tarn::ctl {
 

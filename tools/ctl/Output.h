@@ -1,4 +1,4 @@
-// Output: what the program says: results on stdout, complaints on stderr.
+// Output: what the program says: results on stdout, complaints on stderr, and how it went by its exit status.
 //
 // A reader that has had enough (`| head`) closes the pipe; then the program is to end without a word, so the callers
 // look at good() and isClosed() and nobody complains. SIGPIPE must be ignored. Threads: one.
@@ -10,6 +10,13 @@
 #include "plist/Result.h"
 
 namespace tarn::ctl {
+
+// How the program ends. Part of its contract with scripts.
+inline constexpr int kSuccess = 0;
+inline constexpr int kFailure = 1;       // what no other number says
+inline constexpr int kWrongUsage = 64;   // the command line
+inline constexpr int kBadInput = 65;     // a script, a JSON text, a defaults file
+inline constexpr int kUnreachable = 69;  // no service listens on the socket, or the connection to it broke
 
 class Output {
  public:

@@ -8,7 +8,6 @@
 
 #include "host/system/SystemError.h"
 #include "tools/ctl/Command.h"
-#include "tools/ctl/ExitStatus.h"
 #include "tools/ctl/InputFile.h"
 #include "tools/ctl/Output.h"
 #include "tools/ctl/ScriptPlayer.h"

@@ -12,7 +12,6 @@
 #include "host/system/SystemError.h"
 #include "plist/EscapedText.h"
 #include "plist/formats/Json.h"
-#include "tools/ctl/ExitStatus.h"
 #include "tools/script/ScriptParser.h"
 
 namespace tarn::ctl {

@@ -6,7 +6,6 @@
 #include <thread>
 
 #include "plist/ValueView.h"
-#include "tools/ctl/ExitStatus.h"
 #include "tools/ctl/Output.h"
 
 namespace tarn::ctl {
@@ -18,7 +17,7 @@ using client::Outcome;
 using client::Reply;
 using std::chrono::milliseconds;
 
-// Between two looks at a service that is not there yet, or not at rest.
+// Between two looks at a service that is not there yet.
 constexpr milliseconds kPause{20};
 
 milliseconds left(Clock::time_point deadline) {
@@ -31,11 +30,6 @@ bool nobodyListens(std::int64_t errorNumber) {
 
 std::string silence(const std::string& socket, milliseconds timeout) {
   return "the service at " + socket + " does not answer within " + secondsText(timeout);
-}
-
-// Whether nothing waits, by the service's own word.
-bool isAtRest(const plist::Dictionary& status) {
-  return status.get("queued").asInt64() == 0 && status.get("recorder_waiting").asInt64() == 0;
 }
 
 }  // namespace
@@ -120,24 +114,14 @@ Answer askService(const ServiceAddress& address, const client::Request& request)
 }
 
 int settleService(const ServiceAddress& address) {
-  const auto deadline = Clock::now() + address.timeout;
   const Reached reached = reachService(address);
   if (!reached.client) return kSuccess;
-  for (;;) {
-    const Reply reply = reached.client->call(client::status(), left(deadline));
-    if (reply.ok() && isAtRest(reply.dictionary())) return kSuccess;
-    if (!reply.ok() && reply.outcome != Outcome::TimedOut) {
-      complain("no answer from the service at " + reached.socket + ": " + reply.error.text);
-      return kUnreachable;
-    }
-    if (Clock::now() >= deadline) {
-      complain(reply.ok()
-                   ? "the service at " + reached.socket + " is not at rest within " + secondsText(address.timeout)
-                   : silence(reached.socket, address.timeout));
-      return kUnreachable;
-    }
-    std::this_thread::sleep_for(std::min(kPause, left(deadline)));
-  }
+  const Reply reply = reached.client->call(client::settle(), address.timeout);
+  if (reply.ok()) return kSuccess;
+  complain(reply.outcome == Outcome::TimedOut
+               ? silence(reached.socket, address.timeout)
+               : "no answer from the service at " + reached.socket + ": " + reply.error.text);
+  return kUnreachable;
 }
 
 }  // namespace tarn::ctl

@@ -34,8 +34,9 @@ struct Answer {
 // Connects, asks and waits for the answer.
 Answer askService(const ServiceAddress& address, const client::Request& request);
 
-// Waits until nothing that came to the service by now waits for its queue or for the disk, at most so long as for an
-// answer. A service that isn't there has nothing waiting. The exit status; what went wrong was said on stderr.
+// Waits until all that was handed over to the service by now is committed, and so is what the ends of clients make that
+// have gone, at most so long as for an answer. A service that isn't there has nothing waiting. The exit status; what
+// went wrong was said on stderr.
 int settleService(const ServiceAddress& address);
 
 // "5 s", "0.25 s"

@@ -12,7 +12,6 @@
 
 #include "host/settings/HostPaths.h"
 #include "tools/ctl/Command.h"
-#include "tools/ctl/ExitStatus.h"
 #include "tools/ctl/Output.h"
 
 namespace tarn::ctl {

@@ -53,7 +53,8 @@ class FairSharesTest : public ::testing::Test {
     return made;
   }
   bool serve(std::int64_t budget) {
-    return shares_.serve(budget, [this] { return open_; });
+    return shares_.serve(budget,
+                         [this](const ShareParty& party) { return open_ && !(crowded_ && shares_.isHeavy(party)); });
   }
   std::ptrdiff_t count(std::string_view name) const { return std::count(done_.begin(), done_.end(), name); }
   // Pieces of others that were done before the first of this one.
@@ -62,6 +63,7 @@ class FairSharesTest : public ::testing::Test {
   }
 
   bool open_ = true;
+  bool crowded_ = false;  // heavy ones aren't served
   std::vector<std::string> done_;
   FairShares shares_;
 };
@@ -78,6 +80,60 @@ TEST_F(FairSharesTest, ABudgetEndsTheServingAndTellsWhetherThereIsMore) {
   EXPECT_EQ(count("a"), 64);
   EXPECT_FALSE(serve(64));
   EXPECT_EQ(count("a"), 100);
+}
+
+TEST_F(FairSharesTest, WhoTookMuchLatelyIsPassedOverAndOthersAreServed) {
+  holder(1, "much", 5000);
+  EXPECT_TRUE(serve(4000));
+  holder(2, "little", 10);
+  crowded_ = true;
+  EXPECT_FALSE(serve(4000));
+  EXPECT_EQ(count("little"), 10);
+  EXPECT_EQ(count("much"), 4000);
+  crowded_ = false;
+  EXPECT_FALSE(serve(4000));
+  EXPECT_EQ(count("much"), 5000);
+}
+
+TEST_F(FairSharesTest, AFourthOfWhatWasDoneLatelyIsNotMuchAndMoreIs) {
+  const auto fourth = holder(1, "a", 1000);
+  const auto rest = holder(2, "b", 3000);
+  EXPECT_FALSE(serve(10000));
+  EXPECT_FALSE(shares_.isHeavy(*shares_.partyOf(1)));
+  EXPECT_TRUE(shares_.isHeavy(*shares_.partyOf(2)));
+  fourth->left = 1;
+  shares_.ready(fourth);
+  EXPECT_FALSE(serve(1));
+  EXPECT_TRUE(shares_.isHeavy(*shares_.partyOf(1)));
+}
+
+TEST_F(FairSharesTest, WhatWasTakenLongAgoCountsNoMore) {
+  constexpr std::int64_t kEach = 64;
+  const auto before = holder(1, "a", FairShares::kFadingCost / kEach, kEach);
+  EXPECT_FALSE(serve(2 * FairShares::kFadingCost));
+  EXPECT_TRUE(shares_.isHeavy(*shares_.partyOf(1)));
+  const auto since = holder(2, "b", 4 * FairShares::kFadingCost / kEach, kEach);
+  EXPECT_FALSE(serve(8 * FairShares::kFadingCost));
+  EXPECT_FALSE(shares_.isHeavy(*shares_.partyOf(1)));
+}
+
+TEST_F(FairSharesTest, WhoseTurnItIsIsKnownInItOnly) {
+  struct Curious final : ShareHolder {
+    Curious(std::shared_ptr<ShareParty> party, const FairShares& theShares)
+        : ShareHolder(std::move(party)), shares(theShares) {}
+    Turn takeTurn(std::int64_t) override {
+      seen = shares.served();
+      return {1, false};
+    }
+    void finishWork() override {}
+    const FairShares& shares;
+    const ShareParty* seen = nullptr;
+  };
+  const auto curious = std::make_shared<Curious>(shares_.partyOf(1), shares_);
+  shares_.ready(curious);
+  serve(1);
+  EXPECT_EQ(curious->seen, shares_.partyOf(1).get());
+  EXPECT_EQ(shares_.served(), nullptr);
 }
 
 TEST_F(FairSharesTest, NobodyIsServedWhileItIsShut) {

@@ -74,9 +74,7 @@ class RecordingService::Client final : public platform::TarnReportingServiceProt
     });
   }
   void getAllReporters(platform::Reply<std::vector<std::int64_t>> reply) override {
-    work("getAllReporters", [reply = std::move(reply)]() mutable {
-      reply(std::nullopt, std::vector<std::int64_t>{1, -2, 3});
-    });
+    work("getAllReporters", [this, reply = std::move(reply)]() mutable { reply(std::nullopt, service_.reporters); });
   }
   void killService() override {
     work("killService", [] {});

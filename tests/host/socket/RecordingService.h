@@ -25,8 +25,9 @@ class RecordingService final : public platform::ListenerDelegate,
   bool listenerShouldAcceptNewConnection(const std::shared_ptr<platform::Connection>& connection) override;
 
   // Controls.
-  bool replyTwice = false;           // every message is answered twice
-  std::size_t replyPadding = 0;      // bytes of the dictionary that reporterID answers
+  bool replyTwice = false;                        // every message is answered twice
+  std::size_t replyPadding = 0;                   // bytes of the dictionary that reporterID answers
+  std::vector<std::int64_t> reporters{1, -2, 3};  // that getAllReporters answers
   int slices = 0;                    // a stop is so many events "1 slice" first, each of which may give way
   std::function<void(int)> onSlice;  // called with how many are left
 

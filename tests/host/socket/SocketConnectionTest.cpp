@@ -8,13 +8,6 @@
 namespace tarn::linux_host {
 namespace {
 
-using testing::encoded;
-using testing::eventually;
-using testing::messageRequest;
-using testing::requestOf;
-using testing::TestClient;
-using wire::Operation;
-
 class SocketConnectionTest : public testing::SocketFixture {
  protected:
   void SetUp() override { serve(); }

@@ -12,13 +12,7 @@ namespace tarn::linux_host {
 namespace {
 
 using namespace std::string_literals;
-using testing::encoded;
-using testing::eventually;
 using testing::framed;
-using testing::messageRequest;
-using testing::requestOf;
-using testing::TestClient;
-using wire::Operation;
 
 class SocketFaultTest : public testing::SocketFixture {
  protected:

@@ -49,6 +49,15 @@ class SocketFixture : public ::testing::Test {
       return std::find(all.begin(), all.end(), event) != all.end();
     });
   }
+  // The place of an event among all; the end when it didn't happen.
+  std::ptrdiff_t placeOf(const std::string& event) {
+    const auto all = events();
+    return std::find(all.begin(), all.end(), event) - all.begin();
+  }
+  // Requests that wait for the gate, one a connection.
+  std::size_t held() {
+    return running_.onQueue([this] { return host_->gate.heldCount(); });
+  }
   linux_host::Ledger ledger() {
     return running_.onQueue([this] { return host_->ledger; });
   }
@@ -71,3 +80,13 @@ class SocketFixture : public ::testing::Test {
 };
 
 }  // namespace tarn::testing
+
+// What the tests of this folder talk with.
+namespace tarn::linux_host {
+using testing::encoded;
+using testing::eventually;
+using testing::messageRequest;
+using testing::requestOf;
+using testing::TestClient;
+using wire::Operation;
+}  // namespace tarn::linux_host

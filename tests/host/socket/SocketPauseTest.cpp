@@ -1,4 +1,4 @@
-// What happens while requests may not be taken, and how clients share the loop.
+// What happens while requests may not be taken.
 
 #include <future>
 
@@ -7,18 +7,8 @@
 namespace tarn::linux_host {
 namespace {
 
-using testing::encoded;
-using testing::eventually;
-using testing::messageRequest;
-using testing::requestOf;
-using testing::TestClient;
-using wire::Operation;
-
 class SocketPauseTest : public testing::SocketFixture {
  protected:
-  std::size_t held() {
-    return running_.onQueue([this] { return host_->gate.heldCount(); });
-  }
   // Steps that the loop makes until work that is delayed by this much runs.
   std::uint64_t stepsWithin(std::chrono::milliseconds time) {
     const auto before = running_.loop.progress().sample().steps;
@@ -152,28 +142,6 @@ TEST_F(SocketPauseTest, TheQueueStaysWithinItsBoundWhateverClientsSend) {
     ASSERT_EQ(reply->id, id);
   }
   EXPECT_LE(running_.onQueue([this] { return service_->mostWaiting; }), 8u);
-}
-
-TEST_F(SocketPauseTest, ABusyClientLeavesEachOtherItsShareOfATurn) {
-  limits.gulpBytes = 64;
-  serve();
-  TestClient busy(path_);
-  TestClient modest(path_);
-  ASSERT_TRUE(busy.status() && modest.status());
-  std::string bytes;
-  for (std::uint64_t id = 0; id < 500; ++id) {
-    bytes += encoded(id, requestOf(Operation::CreateReportingSession, 1));
-  }
-  // Both lie in their sockets before the loop looks at either.
-  running_.onQueue([&] {
-    busy.send(bytes);
-    modest.request(1, requestOf(Operation::CreateReportingSession, 2));
-  });
-  ASSERT_TRUE(modest.reply());
-  ASSERT_TRUE(eventually([&] { return events().size() == 501; }));
-  const auto all = events();
-  const auto place = std::find(all.begin(), all.end(), "2 createReportingSession 2") - all.begin();
-  EXPECT_LT(place, 50);
 }
 
 }  // namespace

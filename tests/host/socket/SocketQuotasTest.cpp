@@ -7,13 +7,6 @@
 namespace tarn::linux_host {
 namespace {
 
-using testing::encoded;
-using testing::eventually;
-using testing::messageRequest;
-using testing::requestOf;
-using testing::TestClient;
-using wire::Operation;
-
 class SocketQuotasTest : public testing::SocketFixture {
  protected:
   // The text of the over-quota error that answers this request; the connection goes on afterwards.
@@ -123,7 +116,7 @@ TEST_F(SocketQuotasTest, WhatIsHeldUpIsBoundedByBytes) {
   ASSERT_TRUE(first.status() && second.status());
   paused = true;
   first.send(request);
-  ASSERT_TRUE(eventually([&] { return running_.onQueue([this] { return host_->gate.heldCount() == 1; }); }));
+  ASSERT_TRUE(eventually([&] { return held() == 1; }));
   second.send(request);
   const auto refusal = second.reply();
   ASSERT_TRUE(refusal && refusal->error);

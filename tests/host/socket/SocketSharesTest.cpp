@@ -5,22 +5,27 @@
 namespace tarn::linux_host {
 namespace {
 
-using testing::encoded;
-using testing::eventually;
-using testing::messageRequest;
-using testing::requestOf;
-using testing::TestClient;
-using wire::Operation;
-
 class SocketSharesTest : public testing::SocketFixture {
  protected:
-  // The place of an event among all; the end when it didn't happen.
-  std::ptrdiff_t placeOf(const std::string& event) {
-    const auto all = events();
-    return std::find(all.begin(), all.end(), event) - all.begin();
-  }
   std::int64_t queued() {
     return running_.onQueue([this] { return static_cast<std::int64_t>(running_.loop.queue()->waiting()); });
+  }
+  // What comes before the one request of a client, while another's many lie in its socket already.
+  std::ptrdiff_t servedBeforeTheModestOne(const wire::Request& request, int count) {
+    TestClient busy(path_);
+    TestClient modest(path_);
+    EXPECT_TRUE(busy.status() && modest.status());
+    std::string bytes;
+    for (int id = 0; id < count; ++id) {
+      bytes += encoded(static_cast<std::uint64_t>(id), request);
+    }
+    running_.onQueue([&] {
+      busy.send(bytes);
+      modest.request(1, requestOf(Operation::CreateReportingSession, 2));
+    });
+    EXPECT_TRUE(modest.reply());
+    EXPECT_TRUE(eventually([&] { return events().size() == static_cast<std::size_t>(count) + 1; }));
+    return placeOf("2 createReportingSession 2");
   }
 };
 
@@ -89,7 +94,7 @@ TEST_F(SocketSharesTest, OfAClientThatIsGoneWhatAsksIsDroppedAndWhatTellsIsServe
                 encoded(3, requestOf(Operation::ReporterID, 7)) +
                 encoded(4, requestOf(Operation::GetServiceNameForReporterID, 7)) +
                 encoded(5, requestOf(Operation::Status)) + encoded(6, requestOf(Operation::CreateReportingSession, 9)));
-    ASSERT_TRUE(eventually([&] { return running_.onQueue([this] { return host_->gate.heldCount() == 1; }); }));
+    ASSERT_TRUE(eventually([&] { return held() == 1; }));
   }
   ASSERT_TRUE(eventually([&] { return running_.loop.progress().sample().idle; }));
   resumeRequests();
@@ -111,20 +116,106 @@ TEST_F(SocketSharesTest, AClientThatOnlyStoppedSendingIsAnswered) {
 
 TEST_F(SocketSharesTest, AThousandRequestsOfOneClientDontHoldUpAnother) {
   serve();
-  TestClient busy(path_);
-  TestClient modest(path_);
-  ASSERT_TRUE(busy.status() && modest.status());
-  std::string bytes;
-  for (std::uint64_t id = 0; id < 1000; ++id) {
-    bytes += encoded(id, requestOf(Operation::GetAllReporters));
-  }
+  EXPECT_LE(servedBeforeTheModestOne(requestOf(Operation::GetAllReporters), 1000), 2 * FairShares::kQuantum);
+}
+
+TEST_F(SocketSharesTest, ABusyClientLeavesEachOtherItsShareOfATurn) {
+  limits.gulpBytes = 64;
+  serve();
+  EXPECT_LT(servedBeforeTheModestOne(requestOf(Operation::CreateReportingSession, 1), 500), 50);
+}
+
+TEST_F(SocketSharesTest, WhoMadeItCrowdedStopsAndStatusIsAnswered) {
+  std::atomic<bool> crowded{false};
+  serve();
+  running_.onQueue([&] { host_->gate.setCrowdSource([&] { return crowded.load(); }); });
+  TestClient client(path_);
+  ASSERT_TRUE(client.ask(1, requestOf(Operation::CreateReportingSession, 1)));
+  crowded = true;
+  client.request(2, requestOf(Operation::CreateReportingSession, 2));
+  ASSERT_TRUE(eventually([&] { return held() == 1; }));
+  EXPECT_TRUE(TestClient(path_).status());
+  EXPECT_FALSE(client.readable(0));
+  crowded = false;
+  host_->resumeRequests();
+  EXPECT_TRUE(client.reply());
+}
+
+TEST_F(SocketSharesTest, LongWorkOfWhoMadeItCrowdedStopsToo) {
+  std::atomic<bool> crowded{false};
+  service_->slices = 1000;
+  service_->onSlice = [&](int left) { crowded = left <= 500; };
+  serve();
+  running_.onQueue([&] { host_->gate.setCrowdSource([&] { return crowded.load(); }); });
+  TestClient client(path_);
+  client.request(1, requestOf(Operation::StopReportingSessionForID, 7));
+  ASSERT_TRUE(eventually([&] { return crowded.load(); }));
+  EXPECT_TRUE(TestClient(path_).status());
+  EXPECT_FALSE(client.readable(0));
+  running_.onQueue([this] { service_->onSlice = nullptr; });
+  crowded = false;
+  host_->resumeRequests();
+  EXPECT_TRUE(client.reply());
+}
+
+TEST_F(SocketSharesTest, SettleWaitsForTheEndsOfClientsThatLeftBefore) {
+  service_->slices = 300;
+  serve();
+  std::vector<std::string> before;
   running_.onQueue([&] {
-    busy.send(bytes);
-    modest.request(1, requestOf(Operation::CreateReportingSession, 2));
+    host_->setSettleSource([&](platform::Work done) {
+      before = service_->events;
+      done();
+    });
   });
-  ASSERT_TRUE(modest.reply());
-  ASSERT_TRUE(eventually([&] { return events().size() == 1001; }));
-  EXPECT_LE(placeOf("2 createReportingSession 2"), 2 * FairShares::kQuantum);
+  TestClient leaving(path_);
+  TestClient asking(path_);
+  ASSERT_TRUE(leaving.status() && asking.status());
+  running_.onQueue([&] {
+    leaving.request(1, requestOf(Operation::StopReportingSessionForID, 7));
+    leaving.close();
+    asking.request(1, requestOf(Operation::Settle));
+  });
+  ASSERT_TRUE(asking.reply());
+  EXPECT_EQ(running_.onQueue([&] { return before.empty() ? std::string() : before.back(); }), "1 invalidated");
+  running_.onQueue([&] { host_->setSettleSource(nullptr); });
+}
+
+TEST_F(SocketSharesTest, ManyNumbersAreAnsweredInPiecesAndInOrder) {
+  service_->reporters.clear();
+  for (std::int64_t number = 0; number < 10'000; ++number) {
+    service_->reporters.push_back(number % 2 == 0 ? number * 1000 : -number);
+  }
+  serve();
+  TestClient client(path_);
+  client.send(encoded(1, requestOf(Operation::GetAllReporters)) + encoded(2, requestOf(Operation::ReporterID, 7)));
+  const auto listing = client.reply();
+  const auto next = client.reply();
+  ASSERT_TRUE(listing && next);
+  EXPECT_EQ(listing->id, 1U);
+  EXPECT_EQ(next->id, 2U);
+  std::vector<std::int64_t> numbers;
+  for (const plist::ValueView number : listing->results.at(0).view().array()) {
+    numbers.push_back(number.asInt64());
+  }
+  EXPECT_EQ(numbers, service_->reporters);
+}
+
+TEST_F(SocketSharesTest, AStormOfClientsIsAcceptedAFewATurn) {
+  serve();
+  std::vector<std::uint64_t> accepted;
+  std::vector<std::unique_ptr<TestClient>> storm;
+  running_.onQueue([&] {
+    running_.loop.addTurnHook([&] { accepted.push_back(host_->ledger.connectionsTotal); });
+    for (int i = 0; i < 40; ++i) {
+      storm.push_back(std::make_unique<TestClient>(path_));
+    }
+  });
+  ASSERT_TRUE(eventually([&] { return ledger().connectionsTotal == 40; }));
+  running_.stop();
+  for (std::size_t turn = 1; turn < accepted.size(); ++turn) {
+    EXPECT_LE(accepted[turn] - accepted[turn - 1], 4U);
+  }
 }
 
 }  // namespace
