@@ -140,6 +140,7 @@ TEST_F(RecorderWindow, ASynchronisationThatStallsClosesTheGateUntilItIsOver) {
   EXPECT_TRUE(eventually([&] { return calls == 1; }));
   EXPECT_FALSE(recorder_->isFull());
   EXPECT_EQ(errors(), 0U);
+  stop();  // while its files are still there
 }
 
 TEST_F(RecorderWindow, AKillWhileTheDiskStallsCostsWhatCameInMeanwhileToTheEvent) {
