@@ -10,36 +10,49 @@ namespace tarn::client {
 static_assert(Options().maxFrameBytes == wire::kDefaultMaxFrameBytes);
 
 ClientConnection::Connected ClientConnection::connect(const std::string& path, const Options& options) {
-  Result<Socket> socket = Socket::connect(path);
+  Result<Socket> socket = Socket::connect(path, options.timeout);
   if (socket.failed()) return {nullptr, std::move(socket.error)};
   return {std::make_unique<ClientConnection>(std::move(socket.value), options), {}};
 }
 
+ClientConnection::Connected ClientConnection::connect(const std::string& path) {
+  Options options;
+  options.timeout = std::chrono::minutes(1);
+  return connect(path, options);
+}
+
 ClientConnection::ClientConnection(Socket socket, const Options& options)
-    : options_(options), socket_(std::move(socket)), frames_(options.maxReplyBytes) {}
+    : options_(options), socket_(std::move(socket)), frames_(options.maxReplyBytes) {
+  socket_.limitReceiving(options_.timeout);
+}
 
 ClientConnection::~ClientConnection() {
-  mustBeOutsideHandlers("destroying the client");
+  flush();
   close();
 }
 
 void ClientConnection::setLostHandler(LostHandler handler) {
   const OwnerCheck::Use use(owner_);
-  lostHandler_ = std::move(handler);
+  if (use.granted()) {
+    lostHandler_ = std::move(handler);
+  }
 }
 
 Reply ClientConnection::call(const Request& request, std::optional<Milliseconds> timeout) {
   const OwnerCheck::Use use(owner_);
-  mustBeOutsideHandlers("call");
-  const Deadline deadline = timeout ? Deadline(Clock::now() + *timeout) : std::nullopt;
+  if (!use.granted() || delivering_) return misuse();
+  const Deadline deadline = deadlineAfter(timeout);
   std::optional<Reply> answer;
   ReplyHandler handler = [&answer](Reply&& reply) { answer = std::move(reply); };
-  const SendStatus status = sendWithRoom(request, handler);
+  const SendStatus status = sendWithRoom(request, handler, deadline);
   if (status != SendStatus::Sent) return notSent(status);
   const std::uint64_t id = nextID_ - 1;
   deliverLeftOvers();
+  if (!answer && !timeout) {
+    receiveAtOnce();
+  }
   while (!answer) {
-    if (deadline && Clock::now() >= *deadline) {
+    if (Clock::now() >= deadline) {
       pending_.forget(id);
       return failure(Outcome::TimedOut, "no reply in time");
     }
@@ -50,7 +63,8 @@ Reply ClientConnection::call(const Request& request, std::optional<Milliseconds>
 
 SendStatus ClientConnection::send(const Request& request, ReplyHandler handler) {
   const OwnerCheck::Use use(owner_);
-  const SendStatus status = sendWithRoom(request, handler);
+  if (!use.granted()) return SendStatus::Misuse;
+  const SendStatus status = sendWithRoom(request, handler, deadlineAfter(std::nullopt));
   if (status == SendStatus::Sent && outgoing_.size() - written_ >= options_.autoFlushBytes) {
     writeSome();
   }
@@ -59,6 +73,7 @@ SendStatus ClientConnection::send(const Request& request, ReplyHandler handler) 
 
 SendStatus ClientConnection::trySend(const Request& request, ReplyHandler handler) {
   const OwnerCheck::Use use(owner_);
+  if (!use.granted()) return SendStatus::Misuse;
   SendStatus status = append(request, handler);
   if (status == SendStatus::Full && wantsToWrite()) {
     writeSome();
@@ -70,14 +85,17 @@ SendStatus ClientConnection::trySend(const Request& request, ReplyHandler handle
   return status;
 }
 
-bool ClientConnection::flush() {
+bool ClientConnection::flush(std::optional<Milliseconds> timeout) {
   const OwnerCheck::Use use(owner_);
-  mustBeOutsideHandlers("flush");
+  return use.granted() && !delivering_ && flushUntil(deadlineAfter(timeout));
+}
+
+bool ClientConnection::flushUntil(Deadline deadline) {
   writeSome();
-  while (wantsToWrite()) {
-    exchange(std::nullopt);
+  while (wantsToWrite() && Clock::now() < deadline) {
+    exchange(deadline);
   }
-  return connected() && !writeBroken_;
+  return connected() && !writeBroken_ && !wantsToWrite();
 }
 
 std::size_t ClientConnection::dispatch() {
@@ -86,7 +104,7 @@ std::size_t ClientConnection::dispatch() {
 
 std::size_t ClientConnection::wait(Milliseconds timeout) {
   const OwnerCheck::Use use(owner_);
-  mustBeOutsideHandlers("dispatch or wait");
+  if (!use.granted() || delivering_) return 0;
   const std::size_t before = delivered_;
   deliverLeftOvers();
   if (delivered_ == before) {
@@ -97,6 +115,7 @@ std::size_t ClientConnection::wait(Milliseconds timeout) {
 
 void ClientConnection::close() {
   const OwnerCheck::Use use(owner_);
+  if (!use.granted()) return;
   socket_.close();
   outgoing_.clear();
   written_ = 0;
@@ -106,12 +125,17 @@ void ClientConnection::close() {
   }
 }
 
+ClientConnection::Deadline ClientConnection::deadlineAfter(std::optional<Milliseconds> timeout) const {
+  return Clock::now() + timeout.value_or(options_.timeout);
+}
+
 // Sends, waiting for room where that is allowed and can come.
-SendStatus ClientConnection::sendWithRoom(const Request& request, ReplyHandler& handler) {
+SendStatus ClientConnection::sendWithRoom(const Request& request, ReplyHandler& handler, Deadline deadline) {
   SendStatus status = append(request, handler);
   const bool isStart = request.operation == wire::Operation::StartReportingSessionForID;
-  while (status == SendStatus::Full && !delivering_ && !(isStart && countsAreFull(request))) {
-    exchange(std::nullopt);
+  while (status == SendStatus::Full && !delivering_ && !(isStart && countsAreFull(request)) &&
+         Clock::now() < deadline) {
+    exchange(deadline);
     status = append(request, handler);
   }
   return status;
@@ -209,20 +233,23 @@ void ClientConnection::takeReply(wire::DecodedReply& decoded) {
 }
 
 // One round: write what can be, wait, read what is there, deliver.
-void ClientConnection::exchange(const Deadline& deadline) {
+void ClientConnection::exchange(Deadline deadline) {
   writeSome();
-  const bool writing = wantsToWrite();
-  if (connected() && !writing && !deadline) {
-    readSome(true);
-  } else if (connected()) {
-    std::optional<Milliseconds> left;
-    if (deadline) {
-      left = std::max(Milliseconds(0), std::chrono::ceil<Milliseconds>(*deadline - Clock::now()));
-    }
-    if (left == Milliseconds(0) || socket_.waitUntilReady(writing, left)) {
+  if (connected()) {
+    const auto left = std::max(Milliseconds(0), std::chrono::ceil<Milliseconds>(deadline - Clock::now()));
+    if (left == Milliseconds(0) || socket_.waitUntilReady(wantsToWrite(), left)) {
       writeSome();
       readSome(false);
     }
+  }
+  deliverLeftOvers();
+}
+
+// The same where the whole time is left: the socket itself keeps it, which saves asking whether there is something.
+void ClientConnection::receiveAtOnce() {
+  writeSome();
+  if (connected() && !wantsToWrite()) {
+    readSome(true);
   }
   deliverLeftOvers();
 }
@@ -269,12 +296,6 @@ void ClientConnection::lose(std::string why) {
   written_ = 0;
   ending_ = Ending::Lost;
   lostWhy_ = std::move(why);
-}
-
-void ClientConnection::mustBeOutsideHandlers(const char* operation) const noexcept {
-  if (delivering_) {
-    OwnerCheck::failInsideHandler(operation);
-  }
 }
 
 }  // namespace tarn::client

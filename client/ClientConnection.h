@@ -33,13 +33,15 @@ class ClientConnection {
   using LostHandler = std::function<void(const std::string& why)>;
 
   using Connected = Result<std::unique_ptr<ClientConnection>>;
-  // Connects to the service's socket. Doesn't wait beyond what the kernel does. An error names the path.
+  // Connects to the service's socket. An error names the path.
   static Connected connect(const std::string& path, const Options& options);
-  static Connected connect(const std::string& path) { return connect(path, Options()); }
+  // With patience: for tools and tests, which rather wait a minute for a busy machine.
+  static Connected connect(const std::string& path);
 
   // Takes over a connected stream socket.
   ClientConnection(Socket socket, const Options& options);
-  // Closes.
+  // Flushes for at most the options' timeout, and closes. Whoever runs an operation holds the connection: a handler
+  // can't destroy it.
   ~ClientConnection();
   ClientConnection(const ClientConnection&) = delete;
   ClientConnection& operator=(const ClientConnection&) = delete;
@@ -50,7 +52,7 @@ class ClientConnection {
   SendStatus send(const Request& request, ReplyHandler handler = {});
   SendStatus trySend(const Request& request, ReplyHandler handler = {});
 
-  bool flush();
+  bool flush(std::optional<Milliseconds> timeout = std::nullopt);
   std::size_t dispatch();
   std::size_t wait(Milliseconds timeout);
 
@@ -64,23 +66,25 @@ class ClientConnection {
 
  private:
   using Clock = std::chrono::steady_clock;
-  using Deadline = std::optional<Clock::time_point>;
+  using Deadline = Clock::time_point;
   // How the connection ended, until every handler has heard of it.
   enum class Ending : std::uint8_t { None, Lost, Closed };
 
   SendStatus append(const Request& request, ReplyHandler& handler);
-  SendStatus sendWithRoom(const Request& request, ReplyHandler& handler);
+  SendStatus sendWithRoom(const Request& request, ReplyHandler& handler, Deadline deadline);
   bool countsAreFull(const Request& request) const noexcept;
   void writeSome();
   void readSome(bool mayWait);
   void takeFrames();
   void takeReply(wire::DecodedReply& decoded);
-  void exchange(const Deadline& deadline);
+  void exchange(Deadline deadline);
+  void receiveAtOnce();
+  bool flushUntil(Deadline deadline);
+  Deadline deadlineAfter(std::optional<Milliseconds> timeout) const;
   void deliver(const ReplyHandler& handler, Reply&& reply);
   void deliverCancelled();
   void deliverLeftOvers();
   void lose(std::string why);
-  void mustBeOutsideHandlers(const char* operation) const noexcept;
 
   const Options options_;
   Socket socket_;

@@ -1,5 +1,5 @@
-// OwnerCheck: the rule that one thread at a time uses a client, made executable. Breaking it is a bug of the owner that
-// would corrupt the stream, so it ends the process with a message.
+// OwnerCheck: the rule that one thread at a time uses a client, made executable. An operation of a second thread would
+// corrupt the stream, so it isn't let in and answers that it was misused.
 #pragma once
 
 #include <atomic>
@@ -21,13 +21,14 @@ class OwnerCheck {
     Use(const Use&) = delete;
     Use& operator=(const Use&) = delete;
 
+    // Whether the operation may go on.
+    bool granted() const noexcept { return granted_; }
+
    private:
     OwnerCheck& check_;
-    bool outermost_;
+    bool granted_ = true;
+    bool outermost_ = true;
   };
-
-  // Ends the process: `operation` isn't allowed inside a handler.
-  [[noreturn]] static void failInsideHandler(const char* operation) noexcept;
 
  private:
   std::atomic<std::thread::id> user_{};

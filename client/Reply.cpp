@@ -11,12 +11,18 @@ Reply failure(Outcome outcome, std::string text) {
   return reply;
 }
 
+Reply misuse() {
+  return failure(Outcome::Misuse, "used inside a reply handler, or by two threads at the same time");
+}
+
 Reply notSent(tarnkit::SendStatus status) {
   switch (status) {
     case tarnkit::SendStatus::Full:
       return failure(Outcome::Full, "too many requests are outstanding");
     case tarnkit::SendStatus::TooLarge:
       return failure(Outcome::TooLarge, "the request is longer than a frame may be");
+    case tarnkit::SendStatus::Misuse:
+      return misuse();
     default:
       return failure(Outcome::ConnectionLost, "the connection has ended");
   }

@@ -31,6 +31,7 @@ struct Reply {
 
 // What a failure and a request that was not sent become.
 Reply failure(Outcome outcome, std::string text);
+Reply misuse();
 Reply notSent(tarnkit::SendStatus status);
 
 // Called once for each request that was sent, on the owner's thread.

@@ -1,7 +1,9 @@
 #include "client/Socket.h"
 
+#include <fcntl.h>
 #include <poll.h>
 #include <sys/socket.h>
+#include <sys/types.h>
 #include <sys/un.h>
 #include <unistd.h>
 
@@ -24,6 +26,21 @@ bool wouldWait(int errorNumber) noexcept {
   return errorNumber == EAGAIN || errorNumber == EINTR;
 }
 
+// A local socket has no room in its listener's line or is connected at once: there is nothing to wait for but time.
+int connectUntil(int fd, const sockaddr_un& address, std::chrono::steady_clock::time_point deadline) noexcept {
+  constexpr std::chrono::milliseconds kLongestPause(20);
+  std::chrono::milliseconds pause(1);
+  const auto* generic = reinterpret_cast<const sockaddr*>(&address);
+  while (::connect(fd, generic, sizeof address) != 0) {
+    if (errno == EINTR) continue;
+    if (errno != EAGAIN) return errno;
+    if (std::chrono::steady_clock::now() >= deadline) return ETIMEDOUT;
+    ::poll(nullptr, 0, static_cast<int>(pause.count()));
+    pause = std::min(2 * pause, kLongestPause);
+  }
+  return 0;
+}
+
 }  // namespace
 
 Socket& Socket::operator=(Socket&& other) noexcept {
@@ -34,22 +51,29 @@ Socket& Socket::operator=(Socket&& other) noexcept {
   return *this;
 }
 
-Result<Socket> Socket::connect(const std::string& path) {
+Result<Socket> Socket::connect(const std::string& path, std::chrono::milliseconds timeout) {
   sockaddr_un address{};
   address.sun_family = AF_UNIX;
   if (path.empty() || path.size() >= sizeof address.sun_path) {
     return failed("cannot connect to", path, path.empty() ? ENOENT : ENAMETOOLONG);
   }
   std::memcpy(address.sun_path, path.data(), path.size());
-  Socket socket(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
+  Socket socket(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
   if (!socket.open()) return failed("cannot make a socket for", path, errno);
-  const auto* generic = reinterpret_cast<const sockaddr*>(&address);
-  int result = 0;
-  do {
-    result = ::connect(socket.fd(), generic, sizeof address);
-  } while (result != 0 && errno == EINTR);
-  if (result != 0) return failed("cannot connect to", path, errno);
+  const int error = connectUntil(socket.fd(), address, std::chrono::steady_clock::now() + timeout);
+  if (error != 0) return failed("cannot connect to", path, error);
+  const int flags = ::fcntl(socket.fd(), F_GETFL);
+  if (flags < 0 || ::fcntl(socket.fd(), F_SETFL, flags & ~O_NONBLOCK) != 0) {
+    return failed("cannot set up the socket for", path, errno);
+  }
   return {std::move(socket), {}};
+}
+
+void Socket::limitReceiving(std::chrono::milliseconds timeout) noexcept {
+  const auto microseconds = std::chrono::duration_cast<std::chrono::microseconds>(timeout).count();
+  const std::int64_t limit = std::max<std::int64_t>(microseconds, 1);  // 0 would be for ever
+  const timeval time{limit / 1000000, limit % 1000000};
+  ::setsockopt(fd_, SOL_SOCKET, SO_RCVTIMEO, &time, sizeof time);
 }
 
 void Socket::close() noexcept {
@@ -69,11 +93,10 @@ std::ptrdiff_t Socket::receiveSome(std::span<std::byte> space, bool mayWait) noe
   return received < 0 && wouldWait(errno) ? 0 : -1;
 }
 
-bool Socket::waitUntilReady(bool forWriting, std::optional<std::chrono::milliseconds> timeout) const noexcept {
+bool Socket::waitUntilReady(bool forWriting, std::chrono::milliseconds timeout) const noexcept {
   pollfd watched{fd_, static_cast<short>(forWriting ? POLLIN | POLLOUT : POLLIN), 0};
   constexpr std::int64_t kLongest = std::numeric_limits<int>::max();
-  const int wait = timeout ? static_cast<int>(std::clamp<std::int64_t>(timeout->count(), 0, kLongest)) : -1;
-  return ::poll(&watched, 1, wait) > 0;
+  return ::poll(&watched, 1, static_cast<int>(std::clamp<std::int64_t>(timeout.count(), 0, kLongest))) > 0;
 }
 
 }  // namespace tarn::client

@@ -3,7 +3,6 @@
 
 #include <chrono>
 #include <cstddef>
-#include <optional>
 #include <span>
 #include <string>
 #include <string_view>
@@ -20,19 +19,22 @@ class Socket {
   Socket& operator=(Socket&& other) noexcept;
   ~Socket() { close(); }
 
-  // Connects to the socket at `path`. An error names it.
-  static Result<Socket> connect(const std::string& path);
+  // Connects to the socket at `path`, waiting at most so long for a listener that has others to accept first. An error
+  // names the path; ETIMEDOUT: it had no time.
+  static Result<Socket> connect(const std::string& path, std::chrono::milliseconds timeout);
 
   int fd() const noexcept { return fd_; }
+  // How long receiving waits at most when it is told to wait.
+  void limitReceiving(std::chrono::milliseconds timeout) noexcept;
   bool open() const noexcept { return fd_ >= 0; }
   void close() noexcept;
 
   // Bytes moved: more than 0, 0 when nothing can be moved now, -1 when the connection is over. Neither raises SIGPIPE;
-  // sending never waits, receiving waits for the first byte when told to.
+  // sending never waits, receiving waits for the first byte when told to, at most as long as was set.
   std::ptrdiff_t sendSome(std::string_view bytes) noexcept;
   std::ptrdiff_t receiveSome(std::span<std::byte> space, bool mayWait) noexcept;
-  // Waits until the socket can be read or, when asked, written; nothing means for ever. False when the time is over.
-  bool waitUntilReady(bool forWriting, std::optional<std::chrono::milliseconds> timeout) const noexcept;
+  // Waits until the socket can be read or, when asked, written. False when the time is over.
+  bool waitUntilReady(bool forWriting, std::chrono::milliseconds timeout) const noexcept;
 
  private:
   int fd_ = -1;

@@ -18,6 +18,8 @@ std::string_view outcomeName(Outcome outcome) noexcept {
       return "full";
     case Outcome::TooLarge:
       return "too large";
+    case Outcome::Misuse:
+      return "misuse";
   }
   return "unknown";
 }

@@ -33,18 +33,25 @@ TarnReportingClient::Connected TarnReportingClient::connect(const std::string& p
 TarnReportingClient::TarnReportingClient(std::unique_ptr<tarn::client::ClientConnection> client)
     : client_(std::move(client)) {}
 
-TarnReportingClient::~TarnReportingClient() = default;
+// In a handler an operation holds the connection, too: it ends it then.
+TarnReportingClient::~TarnReportingClient() {
+  if (client_.use_count() > 1) {
+    client_->close();
+  }
+}
 
 void TarnReportingClient::setLostHandler(LostHandler handler) {
   client_->setLostHandler(std::move(handler));
 }
 
 Reply TarnReportingClient::call(const Request& request, std::optional<Milliseconds> timeout) {
-  return tarn::client::unpacked(client_->call(request.content(), timeout));
+  const auto held = client_;
+  return tarn::client::unpacked(held->call(request.content(), timeout));
 }
 
 SendStatus TarnReportingClient::send(const Request& request, ReplyHandler handler) {
-  return client_->send(request.content(), unpacking(std::move(handler)));
+  const auto held = client_;
+  return held->send(request.content(), unpacking(std::move(handler)));
 }
 
 SendStatus TarnReportingClient::trySend(const Request& request, ReplyHandler handler) {
@@ -61,16 +68,19 @@ std::future<Reply> TarnReportingClient::sendForFuture(const Request& request) {
   return future;
 }
 
-bool TarnReportingClient::flush() {
-  return client_->flush();
+bool TarnReportingClient::flush(std::optional<Milliseconds> timeout) {
+  const auto held = client_;
+  return held->flush(timeout);
 }
 
 std::size_t TarnReportingClient::dispatch() {
-  return client_->dispatch();
+  const auto held = client_;
+  return held->dispatch();
 }
 
 std::size_t TarnReportingClient::wait(Milliseconds timeout) {
-  return client_->wait(timeout);
+  const auto held = client_;
+  return held->wait(timeout);
 }
 
 int TarnReportingClient::fd() const noexcept {
@@ -94,7 +104,8 @@ std::uint64_t TarnReportingClient::unmatchedReplies() const noexcept {
 }
 
 void TarnReportingClient::close() {
-  client_->close();
+  const auto held = client_;
+  held->close();
 }
 
 }  // namespace tarnkit

@@ -134,8 +134,9 @@ class RingProducer {
 
   void publish(std::uint64_t head) noexcept {
     head_ = head;
-    Words::store(&header_->posted, ++posted_);
     Words::storeRelease(&header_->head, head);
+    // Counted when it is there: a writer that dies in between has posted one more than it says, never one less.
+    Words::storeRelease(&header_->posted, ++posted_);
   }
 
   tarnring_header* header_ = nullptr;

@@ -35,6 +35,8 @@ CAMPAIGNS = {
     "clock": ("clocksteps", "the wall clock steps by days and years, across restarts: no row is removed"),
     "peers": ("peers", "hostile peers beside a polite client: its waits and losses, and the service's memory"),
     "fulldisk": ("fulldisk", "the disk is full and has room again: nothing is lost or doubled"),
+    "ringkills": ("ringkills", "SIGKILL to programs that post to rings: what a ring calls posted is there, once"),
+    "ringrestarts": ("ringrestarts", "the service ends and starts while programs post to rings: no call fails"),
     "restarts": ("restarts", "SIGTERM at random moments under load: all that was answered is there, once"),
 }
 

@@ -12,28 +12,50 @@ namespace {
 using testing::Pair;
 using testing::Served;
 
-TEST(ClientConnectionDeathTest, ACallInsideAHandlerEndsTheProcess) {
-  GTEST_FLAG_SET(death_test_style, "threadsafe");
-  EXPECT_DEATH(
-      {
-        Pair pair;
-        pair.client->send(getAllReporters(), [&](Reply&&) { pair.client->call(getAllReporters()); });
-        pair.client->flush();
-        pair.server->acknowledge(1);
-        pair.client->wait(std::chrono::seconds(5));
-      },
-      "call inside a reply handler");
+TEST(ClientConnection, WhatAHandlerMayNotDoIsRefused) {
+  Pair pair;
+  Outcome called = Outcome::Ok;
+  bool flushed = true;
+  std::size_t dispatched = 1;
+  pair.client->send(getAllReporters(), [&](Reply&&) {
+    called = pair.client->call(getAllReporters()).outcome;
+    flushed = pair.client->flush();
+    dispatched = pair.client->dispatch() + pair.client->wait(std::chrono::seconds(5));
+  });
+  pair.client->flush();
+  pair.server->acknowledge(1);
+  EXPECT_EQ(pair.client->wait(std::chrono::seconds(60)), 1U);
+  EXPECT_EQ(called, Outcome::Misuse);
+  EXPECT_FALSE(flushed);
+  EXPECT_EQ(dispatched, 0U);
+  EXPECT_TRUE(pair.client->connected());
+  EXPECT_FALSE(pair.server->hasInput());
 }
 
-TEST(ClientConnectionDeathTest, UseByTwoThreadsAtOnceEndsTheProcess) {
-  GTEST_FLAG_SET(death_test_style, "threadsafe");
-  EXPECT_DEATH(
-      {
-        OwnerCheck check;
-        const OwnerCheck::Use use(check);
-        std::thread([&] { const OwnerCheck::Use other(check); }).join();
-      },
-      "used by two threads at the same time");
+TEST(ClientConnection, AnOperationOfASecondThreadIsRefused) {
+  Pair pair;
+  Outcome called = Outcome::Ok;
+  std::vector<SendStatus> sent;
+  bool flushed = true;
+  std::size_t waited = 1;
+  pair.client->send(getAllReporters(), [&](Reply&&) {
+    std::thread([&] {
+      called = pair.client->call(getAllReporters()).outcome;
+      sent = {pair.client->send(getAllReporters()), pair.client->trySend(getAllReporters())};
+      flushed = pair.client->flush();
+      waited = pair.client->wait(std::chrono::seconds(5));
+      pair.client->close();
+    }).join();
+  });
+  pair.client->flush();
+  pair.server->acknowledge(1);
+  EXPECT_EQ(pair.client->wait(std::chrono::seconds(60)), 1U);
+  EXPECT_EQ(called, Outcome::Misuse);
+  EXPECT_EQ(sent, (std::vector<SendStatus>{SendStatus::Misuse, SendStatus::Misuse}));
+  EXPECT_FALSE(flushed);
+  EXPECT_EQ(waited, 0U);
+  EXPECT_TRUE(pair.client->connected());
+  EXPECT_FALSE(pair.server->hasInput());
 }
 
 TEST(ClientConnection, ThreadsMayUseOneClientInTurn) {

@@ -67,8 +67,8 @@ class Ring:
         for put in puts:
             self.put(*put)
         self.untold, self.posted, self.head = [0, 0], self.posted + 1, end
-        self.words[POSTED // 8] = self.posted
         self.words[HEAD // 8] = end  # seen by all long before the interpreter comes to the next line
+        self.words[POSTED // 8] = self.posted
         asleep = self.words[ASLEEP // 8]
         if asleep not in (0, self.woken):
             self.woken = asleep

@@ -173,6 +173,7 @@ class BannedCalls(unittest.TestCase):
         "auto* p = new Session();", "auto* p = ::new Session();",
         "return new Session();", "delete p;", "delete[] p;", "auto p = malloc(5);",
         "std::thread worker(run);", "auto f = std::async(run);", "exit(1);", "::_exit(1);", 'system("ls");',
+        'popen("ls", "r");',
         "std::mutex lock_;", "mutable std::mutex lock_;", "std::recursive_mutex lock_;",
         "const std::lock_guard lock(mutex_);",
         "GTEST_SKIP();", "TEST(A, DISABLED_b) {}", "friend class SessionTest;", "FRIEND_TEST(Session, stops);",

@@ -28,6 +28,7 @@ constexpr std::chrono::seconds kKillPatience{30};
 
 client::Options connectionOptions() {
   client::Options options;
+  options.timeout = std::chrono::minutes(10);  // a script has patience with its service
   options.autoFlushBytes = 0;
   // How long a frame may be is the service's to say: it is configured there.
   options.maxFrameBytes = ScriptLines::kMaxLineBytes;

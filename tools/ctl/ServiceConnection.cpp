@@ -41,8 +41,10 @@ std::string secondsText(milliseconds time) {
 Reached reachService(const ServiceAddress& address, const client::Options& options) {
   Reached reached;
   std::string tried;
+  client::Options patient = options;
+  patient.timeout = std::max(options.timeout, address.timeout);
   for (const std::string& socket : address.sockets) {
-    auto connected = client::ClientConnection::connect(socket, options);
+    auto connected = client::ClientConnection::connect(socket, patient);
     if (connected.ok()) {
       reached.client = std::move(connected.value);
       reached.socket = socket;

@@ -34,8 +34,6 @@ ROOMS = {
     "clients/ring": (),
     "clients/c/include": (),
     "clients/c/src": ("clients/ring", "clients/c/include"),
-    # A program of somebody else, who has the installed headers alone.
-    "examples/wavplay": (),
     # What can be said, as data, and the constants that are made of it.
     "dictionary": (),
     "platform": VALUES,
@@ -66,7 +64,7 @@ ROOMS = {
     "tests/scenario": VALUES + ("client", "wire", "recorder/store"),
 }
 # Folders, with all below them, whose files may look at everything.
-TRIALS = ("tests", "bench", "fuzz")
+TRIALS = ("tests", "bench", "fuzz", "examples")
 # The entry point owns no behaviour: it puts together what the folders hold.
 ENTRY = "service/main.cpp"
 

@@ -19,9 +19,10 @@ enum class Outcome : std::uint8_t {
   TimedOut,        // call() gave up waiting; a reply that still comes is dropped
   Full,            // not sent: too many requests are outstanding
   TooLarge,        // not sent: the request is longer than a frame may be
+  Misuse,          // not sent: another thread is just using the client, or call() was called inside a handler
 };
 
-// "ok", "error", "cancelled", "connection lost", "timed out", "full", "too large". The text lives for ever.
+// "ok", "error", "cancelled", "connection lost", "timed out", "full", "too large", "misuse". The text lives for ever.
 std::string_view outcomeName(Outcome outcome) noexcept;
 
 // For Outcome::Error; for the other failures its text says more, its domain is empty.

@@ -7,10 +7,12 @@
 //   send(), trySend()   append to the outgoing buffer; written by flush(), or once autoFlushBytes have gathered
 //   dispatch(), wait()  write what can be written, read what is there, deliver
 //
-// Handlers run on the owner's thread, inside call, send, flush, dispatch, wait and close, never inside trySend. A
-// handler may send, trySend and close; inside a handler send doesn't wait either. It may not call, flush, dispatch,
-// wait or destroy the client: that, like use by two threads at once, ends the process with a message. Different threads
-// may use one client in turn.
+// Whatever waits does so at most as long as it is told, else as Options::timeout says.
+//
+// Handlers run on the owner's thread, inside call, send, flush, dispatch, wait, close and the destruction, never inside
+// trySend. A handler may send, trySend, close and destroy the client; inside a handler send doesn't wait either. It may
+// not call, flush, dispatch or wait: that does nothing and answers Misuse, false or 0, as does an operation while
+// another thread is inside one. Different threads may use one client in turn.
 //
 // Every request that was sent has its handler called exactly once: with the reply, with ConnectionLost when the
 // connection ends (then the lost handler is called once, after them), or with Cancelled at close(). A start's reply is
@@ -47,22 +49,23 @@ class TarnReportingClient {
     int errorNumber = 0;                          // of the system call that failed
     std::string error;                            // what failed, with the path
   };
-  // Connects to the service's socket. Doesn't wait beyond what the kernel does.
+  // Connects to the service's socket.
   static Connected connect(const std::string& path, const Options& options = {});
 
   // The library's own.
   explicit TarnReportingClient(std::unique_ptr<tarn::client::ClientConnection> client);
-  // Closes.
+  // Flushes and closes. What still isn't written when the time is up is lost. Inside a handler it closes at once, and
+  // the handlers that are left are called by the operation that it is inside of.
   ~TarnReportingClient();
   TarnReportingClient(const TarnReportingClient&) = delete;
   TarnReportingClient& operator=(const TarnReportingClient&) = delete;
 
   void setLostHandler(LostHandler handler);
 
-  // Sends and waits for the reply, at most so long. Everything sent before is written first.
+  // Sends and waits for the reply. Everything sent before is written first.
   Reply call(const Request& request, std::optional<Milliseconds> timeout = std::nullopt);
-  // Sends; where a bound is reached waits until the service has taken or answered enough. Not Sent: the handler is
-  // never called.
+  // Sends; where a bound is reached waits until the service has taken or answered enough, then is Full. Not Sent: the
+  // handler is never called.
   SendStatus send(const Request& request, ReplyHandler handler = {});
   // Never waits and never reads. What it allocates is bounded by the options.
   SendStatus trySend(const Request& request, ReplyHandler handler = {});
@@ -70,8 +73,8 @@ class TarnReportingClient {
   std::future<Reply> sendForFuture(const Request& request);
 
   // Writes everything that is waiting; reads and delivers replies while the service doesn't take it. False when the
-  // connection is lost.
-  bool flush();
+  // connection is lost or the time is up.
+  bool flush(std::optional<Milliseconds> timeout = std::nullopt);
   // Writes and reads what can be without waiting. Returns how many handlers were called.
   std::size_t dispatch();
   // Waits until there is something to write or read, at most so long, then does what dispatch does.
@@ -90,7 +93,7 @@ class TarnReportingClient {
   void close();
 
  private:
-  std::unique_ptr<tarn::client::ClientConnection> client_;
+  std::shared_ptr<tarn::client::ClientConnection> client_;  // an operation holds it, too
 };
 
 }  // namespace tarnkit

@@ -50,11 +50,14 @@ namespace tarn::reporting {
 
 void addTo(Totals& totals, const tarnreporting_writer& writer) noexcept {
   const tarnring_header& header = *writer.header;
-  totals.taken += loadAcquire(header.taken_messages);
+  // What another thread is just posting may be taken before it is counted.
+  const std::uint64_t taken = loadAcquire(header.taken_messages);
+  const std::uint64_t posted = loadAcquire(header.posted);
+  totals.taken += taken;
+  totals.posted += posted > taken ? posted : taken;
   totals.committed += loadAcquire(header.committed_messages);
   totals.refused += loadAcquire(header.refused);
   totals.dropped += loadAcquire(header.dropped);
-  totals.posted += loadAcquire(header.posted);
 }
 
 }  // namespace tarn::reporting
