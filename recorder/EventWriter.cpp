@@ -32,15 +32,20 @@ RetentionLimits limitsOf(const RecorderOptions& options) {
   return {capOf(options), options.maxAgeDays * kSecondsADay};
 }
 
-// One transaction of a small file must not outgrow what retention keeps free; nor may the log, which takes one more
-// than what makes it due to be brought in.
-std::size_t transactionBytes(const RecorderOptions& options) {
-  return static_cast<std::size_t>(std::clamp(capOf(options) / 16, std::int64_t{1} << 16, std::int64_t{1} << 23));
+// One transaction of a small file must not outgrow what retention keeps free.
+std::int64_t transactionBytes(const RecorderOptions& options) {
+  return std::clamp(capOf(options) / 16, std::int64_t{1} << 16, std::int64_t{1} << 23);
 }
 
+// Beyond this the log is brought in, and beyond twice as much commits wait for it.
+std::int64_t logLimit(const RecorderOptions& options) {
+  return std::clamp(capOf(options) / 32, std::int64_t{1} << 16, std::int64_t{1} << 24);
+}
+
+// Nor may the log, which takes one transaction more than its limits.
 std::int64_t logReserve(const RecorderOptions& options) {
   constexpr std::int64_t kPages = std::int64_t{1} << 17;  // that a transaction touches beside its events
-  return static_cast<std::int64_t>(transactionBytes(options)) * 3 + kPages;
+  return 2 * (logLimit(options) + transactionBytes(options)) + kPages;
 }
 
 }  // namespace
@@ -51,7 +56,7 @@ EventWriter::EventWriter(const RecorderOptions& options, platform::Log& log, con
       log_(log),
       file_(options.file, limitsOf(options), clock, options.boot.empty() ? RecorderTime::currentBoot() : options.boot),
       usage_(options.file, options.kinds, options.asideMaxAgeDays, capOf(options)) {
-  file_.setLogLimit(static_cast<std::int64_t>(transactionBytes(options)));
+  file_.setLogLimit(logLimit(options));
 }
 
 bool EventWriter::open() {
@@ -169,7 +174,7 @@ Result<std::size_t> EventWriter::writeOnce(const EventBatch& batch, std::size_t 
   if (const std::int64_t in = file_.takeRowsInDoubt(); in > 0) return {static_cast<std::size_t>(in)};
   Status error = file_.begin();
   const SteadyClock::time_point start = SteadyClock::now();
-  const std::size_t most = transactionBytes(options_);
+  const auto most = static_cast<std::size_t>(transactionBytes(options_));
   std::size_t bytes = 0;
   std::size_t next = from;
   for (; error.ok() && next < batch.size() && bytes < most; ++next) {

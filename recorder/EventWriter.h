@@ -51,6 +51,7 @@ class EventWriter {
   void close() noexcept { file_.close(); }
 
   bool hasMoreToExpire() const noexcept { return file_.hasMoreToExpire(); }
+  bool hasMoreToBringIn() const noexcept { return file_.isOpen() && file_.hasMoreToBringIn(); }
   std::uint64_t expired() const noexcept { return file_.expired(); }
   const std::string& problem() const noexcept { return problem_; }
 

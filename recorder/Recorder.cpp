@@ -263,6 +263,9 @@ bool Recorder::writeCurrent() {
     position_ = 0;
   }
   const bool healthy = events > 0 && writer_.settle();
+  if (writer_.hasMoreToBringIn()) {
+    nextMaintenance_ = std::min(nextMaintenance_, SteadyClock::now() + options_.lastRetry);
+  }
   mutex_.lock();
   return healthy;
 }
@@ -298,7 +301,10 @@ bool Recorder::hasRoom() const {
 bool Recorder::maintain() {
   mutex_.unlock();
   const bool healthy = writer_.maintain() && writer_.settle();
-  const auto pause = writer_.hasMoreToExpire() ? std::chrono::milliseconds(0) : options_.maintenanceInterval;
+  auto pause = writer_.hasMoreToBringIn() ? options_.lastRetry : options_.maintenanceInterval;
+  if (writer_.hasMoreToExpire()) {
+    pause = std::chrono::milliseconds(0);
+  }
   nextMaintenance_ = SteadyClock::now() + pause;
   mutex_.lock();
   expired_ = writer_.expired();

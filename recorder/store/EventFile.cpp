@@ -71,6 +71,7 @@ Status EventFile::open() {
     closeAfterFault();
   } else {
     checked_ = opened_;
+    checkpointer_.open(path_.string());
   }
   return error;
 }
@@ -216,11 +217,13 @@ void EventFile::finalizeStatements() noexcept {
 }
 
 void EventFile::close() noexcept {
+  checkpointer_.close();
   finalizeStatements();
   connection_.closeAndTidy();
 }
 
 void EventFile::closeAfterFault() noexcept {
+  checkpointer_.close();
   finalizeStatements();
   connection_.close();
 }
@@ -231,6 +234,7 @@ void EventFile::closeForAnotherLook() noexcept {
 }
 
 void EventFile::leave() noexcept {
+  checkpointer_.finish();
   if (isOpen()) {
     sqlite3_wal_checkpoint_v2(connection_.handle(), nullptr, SQLITE_CHECKPOINT_PASSIVE, nullptr, nullptr);
   }
@@ -296,6 +300,7 @@ Status EventFile::checkLog() {
     logInode_ = status.st_ino;
   }
   if (!isThere || status.st_ino != logInode_) {
+    checkpointer_.finish();
     sqlite3_wal_checkpoint_v2(connection_.handle(), nullptr, SQLITE_CHECKPOINT_PASSIVE, nullptr, nullptr);
     closeForAnotherLook();
     return Error{SQLITE_IOERR, "its log was taken away"};
@@ -457,7 +462,13 @@ Status EventFile::verify(std::chrono::steady_clock::time_point deadline) {
 }
 
 Status EventFile::checkpointIfDue() {
-  if (logPages_ * pageBytes_ < logLimit_) return {};
+  // Whether all of it is in: nothing was committed in the meantime.
+  if (checkpointer_.takeBroughtIn() == logPages_) {
+    logPages_ = 0;
+  }
+  const std::int64_t bytes = logPages_ * pageBytes_;
+  if (bytes < logLimit_ || (bytes < 2 * logLimit_ && checkpointer_.begin())) return {};
+  checkpointer_.finish();
   int pages = 0;
   const int code = sqlite3_wal_checkpoint_v2(connection_.handle(), nullptr, SQLITE_CHECKPOINT_PASSIVE, &pages, nullptr);
   // A reader in the way is no fault: the rest is brought in later.

@@ -24,6 +24,7 @@
 
 #include "platform/Clock.h"
 #include "plist/Result.h"
+#include "recorder/store/Checkpointer.h"
 #include "recorder/store/Connection.h"
 #include "recorder/store/EventGroup.h"
 #include "recorder/store/RecorderTime.h"
@@ -99,13 +100,16 @@ class EventFile {
   // Events removed by the transactions committed so far.
   std::uint64_t expired() const noexcept { return expired_; }
 
-  // What the database may take, and how large its log grows before it is brought in.
+  // What the database may take, and how large its log grows before it is brought in while commits go on. At twice the
+  // size they wait for it.
   void setMaxBytes(std::int64_t maxBytes) noexcept { retention_.setMaxBytes(maxBytes); }
   void setLogLimit(std::int64_t bytes) noexcept { logLimit_ = bytes; }
   // Of the log, which a reader that holds on to an old state keeps from starting again.
   std::int64_t logBytes() const noexcept { return logBytes_; }
   // Brings the write-ahead log into the database when it has grown large enough.
   [[nodiscard]] Status checkpointIfDue();
+  // Whether that isn't over yet: another look will help.
+  bool hasMoreToBringIn() const noexcept { return logPages_ * pageBytes_ >= logLimit_; }
 
  private:
   struct Identity {
@@ -132,6 +136,7 @@ class EventFile {
   const std::filesystem::path path_;
   const platform::Clock& clock_;
   Connection connection_;
+  Checkpointer checkpointer_;
   Statement begin_;
   Statement insert_;
   Statement carry_;

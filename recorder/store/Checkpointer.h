@@ -1,0 +1,52 @@
+// Checkpointer: brings the write-ahead log into the database on a thread and a connection of its own.
+//
+// Which problem: what stands in the log is copied and synchronised for tens of milliseconds, once for some megabytes;
+// on the writer's thread all that comes in meanwhile would wait for it. How: SQLite lets one connection commit while
+// another one copies. It ends as far as the log went when it began, so the log begins anew only when nothing was
+// committed in the meantime, and whoever must have that does the rest on the writer's thread, which is then little.
+//
+// What fails here is tried again by the writer, whose error is the one that counts. Owner: the event file. Threads:
+// the writer's.
+#pragma once
+
+#include <string>
+#include <thread>
+
+#include "plist/ThreadSafety.h"
+#include "recorder/store/Connection.h"
+
+namespace tarn::recorder {
+
+class Checkpointer {
+ public:
+  Checkpointer() = default;
+  ~Checkpointer() { close(); }
+  Checkpointer(const Checkpointer&) = delete;
+  Checkpointer& operator=(const Checkpointer&) = delete;
+
+  // Gets ready for a file that the writer has open; what fails shows in begin().
+  void open(const std::string& file);
+  // Begins to bring the log in unless that is under way. False when the writer must do it.
+  [[nodiscard]] bool begin();
+  // How many pages the log had when the last one was over and had brought all of it in; 0: it hadn't. Told once.
+  int takeBroughtIn();
+  // Waits until none is under way.
+  void finish();
+  // The same, and lets go of the file.
+  void close() noexcept;
+
+ private:
+  [[nodiscard]] bool startThread();
+  void run();
+
+  std::thread thread_;
+  Connection connection_;  // while busy_, the thread's
+  Mutex mutex_;
+  ConditionVariable changed_;
+  bool busy_ TARN_GUARDED_BY(mutex_) = false;
+  bool failed_ TARN_GUARDED_BY(mutex_) = false;
+  int broughtIn_ TARN_GUARDED_BY(mutex_) = 0;
+  bool stopping_ TARN_GUARDED_BY(mutex_) = false;
+};
+
+}  // namespace tarn::recorder
