@@ -115,7 +115,7 @@ static gboolean take_event(GstBaseTransform* transform, GstEvent* event) {
   return GST_BASE_TRANSFORM_CLASS(tarn_report_parent_class)->sink_event(transform, event);
 }
 
-static void set_property(GObject* object, guint property, const GValue* value, GParamSpec* spec) {
+static void set_property(GObject* object, guint property, const GValue* value, GParamSpec* parameter) {
   TarnReport* self = TARN_REPORT(object);
   gchar** text = property == PROP_APPLICATION ? &self->application
                  : property == PROP_ROUTE     ? &self->route
@@ -131,11 +131,11 @@ static void set_property(GObject* object, guint property, const GValue* value, G
     self->volume = g_value_get_double(value); /* the streaming thread tells it */
     GST_OBJECT_UNLOCK(self);
   } else {
-    G_OBJECT_WARN_INVALID_PROPERTY_ID(object, property, spec);
+    G_OBJECT_WARN_INVALID_PROPERTY_ID(object, property, parameter);
   }
 }
 
-static void get_property(GObject* object, guint property, GValue* value, GParamSpec* spec) {
+static void get_property(GObject* object, guint property, GValue* value, GParamSpec* parameter) {
   TarnReport* self = TARN_REPORT(object);
   switch (property) {
     case PROP_APPLICATION:
@@ -154,7 +154,7 @@ static void get_property(GObject* object, guint property, GValue* value, GParamS
       g_value_set_double(value, self->volume);
       break;
     default:
-      G_OBJECT_WARN_INVALID_PROPERTY_ID(object, property, spec);
+      G_OBJECT_WARN_INVALID_PROPERTY_ID(object, property, parameter);
   }
 }
 

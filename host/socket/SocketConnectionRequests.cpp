@@ -1,0 +1,133 @@
+// The requests of SocketConnection: what is done with one that was decoded, until its work waits in the lane.
+#include <chrono>
+#include <utility>
+
+#include "host/socket/SocketConnection.h"
+
+namespace tarn::linux_host {
+
+namespace {
+
+// Of an answer to `status`, in units of cost.
+constexpr std::size_t kStatusCost = 24;
+
+}  // namespace
+
+void SocketConnection::serveRequest(wire::DecodedRequest& request, std::size_t frameBytes) {
+  if (peerGone_ && onlyAsks(request.operation)) {
+    lane_.spend(1);
+    ++host_.ledger.questionsDropped;
+    return;
+  }
+  if (request.operation == wire::Operation::Status) {
+    // At once: whoever asks how the service is must not wait for its work.
+    lane_.spend(kStatusCost);
+    sendReply(request.id, {host_.status()});
+    return;
+  }
+  if (!refusal_.empty()) {
+    refuseRequest(request.id, refusal_);
+    return;
+  }
+  if (request.operation == wire::Operation::OpenRing || request.operation == wire::Operation::DeclareShape) {
+    lane_.spend(costOf(request, frameBytes));
+    serveRingOperation(request);
+    return;
+  }
+  if (!host_.takesFrom(&party())) {
+    hold(request, frameBytes);
+    return;
+  }
+  lane_.spend(costOf(request, frameBytes));
+  if (request.operation == wire::Operation::SendMessage) {
+    ++host_.ledger.messagesReceived;
+  }
+  if (const std::string why = quotaRefusal(request); !why.empty()) [[unlikely]] {
+    host_.ledger.messagesOverQuota += request.operation == wire::Operation::SendMessage ? 1 : 0;
+    refuseRequest(request.id, why);
+  } else if (request.operation == wire::Operation::Settle) {
+    settle(request.id);
+  } else {
+    const WorkLane::Scope scope(&lane_);
+    dispatchRequest(request, *object_, weak_from_this());
+  }
+}
+
+// The request stays here until it can be served. Only one of a connection does, but there may be many connections.
+void SocketConnection::hold(wire::DecodedRequest& request, std::size_t frameBytes) {
+  if (const std::string why = use_.refusalOfWaitingBytes(frameBytes); !why.empty()) {
+    refuseRequest(request.id, why);
+    return;
+  }
+  heldRequest_ = std::move(request);
+  heldBytes_ = frameBytes;
+  host_.gate.countHeld();
+  host_.shares.ready(self());
+  countWaitingBytes(0);
+}
+
+// All that was sent before it is dealt with by now; what that handed over is to be committed.
+void SocketConnection::settle(std::uint64_t id) {
+  host_.settle([sink = weak_from_this(), id] {
+    if (const auto connection = sink.lock()) {
+      connection->sendReply(id, {});
+    }
+  });
+}
+
+std::string SocketConnection::quotaRefusal(const wire::Request& request) {
+  if (request.operation == wire::Operation::SendMessage) {
+    if (!use_.limitsMessages()) return {};
+    const auto now = host_.loop.clock().monotonic();
+    return use_.refusalOfMessage(std::chrono::duration_cast<std::chrono::seconds>(now).count());
+  }
+  if (request.operation == wire::Operation::CreateReportingSession && !object_->hasSession(request.reporterID)) {
+    countSessions();
+    return use_.refusalOfSession();
+  }
+  return {};
+}
+
+void SocketConnection::refuseRequest(std::uint64_t id, const std::string& why) {
+  lane_.spend(1);
+  host_.ledger.countRefusal(wire::ErrorCode::OverQuota);
+  sendError(id, {wire::kErrorDomain, static_cast<std::int64_t>(wire::ErrorCode::OverQuota), why});
+}
+
+void SocketConnection::serveRingOperation(const wire::DecodedRequest& request) {
+  if (rings_ == nullptr) {
+    rings_ = host_.rings.connect(weak_from_this());
+  }
+  if (request.operation == wire::Operation::OpenRing) {
+    const Result<std::uint64_t> opened = rings_->open(std::exchange(descriptors_, {}));
+    answerRingOperation(request.id, opened.value, opened.error);
+  } else {
+    answerRingOperation(request.id, true, rings_->declareShape(request.dictionary));
+  }
+}
+
+void SocketConnection::answerRingOperation(std::uint64_t id, plist::ValueView result, const Status& done) {
+  if (done.ok()) {
+    sendReply(id, {result});
+    return;
+  }
+  host_.ledger.countRefusal(wire::ErrorCode::BadArguments);
+  sendError(id, {wire::kErrorDomain, static_cast<std::int64_t>(wire::ErrorCode::BadArguments), done->text});
+}
+
+// In the connection's own line, after what it sent over the socket before.
+void SocketConnection::serveRingRequest(wire::DecodedRequest& request) {
+  if (request.operation == wire::Operation::SendMessage) {
+    ++host_.ledger.messagesReceived;
+  }
+  const WorkLane::Scope scope(&lane_);
+  dispatchRequest(request, *object_, {});
+  host_.shares.ready(self());
+}
+
+void SocketConnection::afterRingRequests(platform::Work work) {
+  host_.loop.queue()->asyncIn(lane_, std::move(work));
+  host_.shares.ready(self());
+}
+
+}  // namespace tarn::linux_host
