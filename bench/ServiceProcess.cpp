@@ -5,6 +5,7 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <chrono>
 #include <cstdlib>
 #include <fstream>
 
@@ -57,7 +58,7 @@ void ServiceProcess::start(const std::string& program) {
 void ServiceProcess::waitUntilReady() const {
   const double latest = nowSeconds() + kReadySeconds;
   for (;;) {
-    const Result<client::Socket> connected = client::Socket::connect(socketPath());
+    const Result<client::Socket> connected = client::Socket::connect(socketPath(), std::chrono::seconds(2));
     if (connected.ok()) return;
     if (::waitpid(id_, nullptr, WNOHANG) != 0) {
       fail("the service ended at once");
