@@ -63,10 +63,7 @@ Status RecorderTime::keep(Connection& connection) {
   const Moment moment = now();
   const double wallThen = moment.wall - (moment.monotonic - seen_.monotonic);
   if (std::abs(wallThen - seen_.wall) >= kTolerance) {
-    // When it came between the two is unknown: what the wall clock said before holds until now, what it says since
-    // then.
     if (auto error = note(connection, {seen_.monotonic, wallThen}); error.failed()) return error;
-    if (auto error = note(connection, moment); error.failed()) return error;
   }
   seen_ = moment;
   return {};
@@ -76,9 +73,8 @@ double RecorderTime::secondsAt(double wall) const noexcept {
   std::optional<double> latest;
   for (std::size_t i = 0; i < ties_.size(); ++i) {
     if (ties_[i].wall > wall) continue;
-    // A step is two notes, and holds from the second on for certain.
-    const double end = i + 2 < ties_.size() ? ties_[i + 2].seconds : seconds();
-    const double then = std::min(ties_[i].seconds + (wall - ties_[i].wall), end);
+    const double next = i + 1 < ties_.size() ? ties_[i + 1].seconds : seconds();
+    const double then = std::min(ties_[i].seconds + (wall - ties_[i].wall), next);
     latest = std::max(latest.value_or(then), then);
   }
   if (latest) return *latest;

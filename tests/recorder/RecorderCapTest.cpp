@@ -184,20 +184,6 @@ TEST_F(RecorderFileAge, AStepWhileNoRecorderRunsMakesNoFileOlder) {
   }
 }
 
-TEST_F(RecorderFileAge, AStepLongAfterTheLastNoteMakesNoFileOlder) {
-  for (const double days : {400.0, -400.0, 20'000.0}) {
-    look();
-    pass(100);
-    writeNow(summaries() / "before.json");
-    step(days);
-    writeNow(summaries() / "after.json");
-    pass(29);
-    look();
-    EXPECT_TRUE(std::filesystem::exists(summaries() / "before.json")) << days;
-    EXPECT_TRUE(std::filesystem::exists(summaries() / "after.json")) << days;
-  }
-}
-
 TEST_F(RecorderFileAge, WhatIsOlderThanTheStoreIsAsOldAsItAtTheLeast) {
   writeNow(summaries() / "a.json");
   pass(100);
