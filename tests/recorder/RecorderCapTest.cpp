@@ -110,14 +110,10 @@ class RecorderFileAge : public RecorderCap {
     options_.asideMaxAgeDays = 40;
   }
   void writeNow(const std::filesystem::path& path) {
-    // Beside its place first: a recorder that runs would see the time of the machine.
-    const std::filesystem::path written = directory_.path() / "written";
-    write(written, 10);
+    write(path, 10);
     const auto seconds = static_cast<std::time_t>(clock_.epochSeconds());
     const timespec times[] = {{seconds, 0}, {seconds, 0}};
-    ASSERT_EQ(::utimensat(AT_FDCWD, written.c_str(), times, 0), 0);
-    std::filesystem::create_directories(path.parent_path());
-    std::filesystem::rename(written, path);
+    ASSERT_EQ(::utimensat(AT_FDCWD, path.c_str(), times, 0), 0);
   }
   void pass(double days) { clock_.advance(std::chrono::seconds(static_cast<std::int64_t>(days * kSecondsADay))); }
   void step(double days) { clock_.setEpochSeconds(clock_.epochSeconds() + days * kSecondsADay); }
