@@ -20,9 +20,6 @@ constexpr std::string_view kModule = "LinuxPlatform";
 // What a commit to a slow disk may take, as it is told to the service manager.
 constexpr std::chrono::seconds kLongestCommit{15};
 constexpr std::chrono::seconds kLongestFlush{10};
-constexpr double kSummariesMaxAgeDays = 365;
-constexpr double kTracesMaxAgeDays = 30;
-constexpr double kPerfDataMaxAgeDays = 90;
 
 HostLimits withinTheSystem(HostLimits limits) {
   limits.maxConnections = std::min(limits.maxConnections, connectionsWithin(raiseDescriptorLimit()));
@@ -34,10 +31,7 @@ recorder::RecorderOptions recorderOptions(const HostConfiguration& configuration
   recorder::RecorderOptions options = configuration.recorder;
   options.file = stateDirectory + "/recorder.sqlite3";
   const std::string logs = configuration.paths.diagnosticLogs.value_or(stateDirectory) + "/DiagnosticLogs/Audio/";
-  // Summaries outlive the messages; beside the traces lie the perf-data files that were made of them.
-  options.kinds = {{logs + "Reporting", "", kSummariesMaxAgeDays},
-                   {logs + "Traces", ".json", kTracesMaxAgeDays},
-                   {logs + "Traces", "", kPerfDataMaxAgeDays}};
+  options.folders = {logs + "Reporting", logs + "Traces"};
   return options;
 }
 

@@ -55,7 +55,7 @@ EventWriter::EventWriter(const RecorderOptions& options, platform::Log& log, con
       clock_(clock),
       log_(log),
       file_(options.file, limitsOf(options), clock, options.boot.empty() ? RecorderTime::currentBoot() : options.boot),
-      usage_(options.file, options.kinds, options.asideMaxAgeDays, capOf(options)) {
+      usage_(options.file, options.folders, capOf(options)) {
   file_.setLogLimit(logLimit(options));
 }
 
@@ -115,8 +115,8 @@ Status EventWriter::noteMissing() {
 
 void EventWriter::tidy() {
   if (!carrying_) {
-    for (const std::string& gone : usage_.tidy([this](double wall) { return file_.ageOf(wall); })) {
-      log_.notice("recorder removed " + gone);
+    for (const std::string& name : usage_.tidy()) {
+      log_.notice("recorder removed " + name + ": its kind is over its share");
     }
   }
   limitDatabase();
@@ -258,10 +258,9 @@ bool EventWriter::verify() {
 Status EventWriter::maintainOnce() {
   Status error = openOnce();
   if (error.ok()) {
-    error = file_.keepTime();
+    tidy();
   }
   if (error.ok()) {
-    tidy();
     error = file_.begin();
   }
   if (error.ok()) {

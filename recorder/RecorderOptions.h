@@ -8,20 +8,16 @@
 #include <string>
 #include <vector>
 
-#include "recorder/store/StateUsage.h"
-
 namespace tarn::recorder {
 
 struct RecorderOptions {
   std::filesystem::path file;
 
   // Retention: beyond either, the oldest events go first. A megabyte is 2^20 bytes; at least one is kept. The size is
-  // that of the database with its log, of files set aside, and of the files of these kinds; see StateUsage.
+  // that of the database with its log, of files set aside, and of the files in these folders; see StateUsage.
   std::int64_t maxMegabytes = 256;
+  std::vector<std::filesystem::path> folders;
   double maxAgeDays = 30;
-  std::vector<FileKind> kinds;
-  // Of files set aside: somebody should have looked at them by then.
-  double asideMaxAgeDays = 90;
   // How often an idle recorder looks for events that have grown too old.
   std::chrono::milliseconds maintenanceInterval{60'000};
 

@@ -75,10 +75,6 @@ class EventFile {
 
   // Now, on the recorder's own time.
   double seconds() const noexcept { return time_.seconds(); }
-  // Of what was written at this time of the wall clock, in seconds.
-  double ageOf(double wall) const noexcept { return time_.seconds() - time_.secondsAt(wall); }
-  // Notes a step of the wall clock. Outside of transactions.
-  [[nodiscard]] Status keepTime() { return time_.keep(connection_); }
   // The id of the last committed event, in this file or in those before it.
   std::int64_t lastId() const noexcept { return lastId_; }
   // Never two events with one id: the ids of a file that was set aside count too.

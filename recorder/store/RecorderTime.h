@@ -5,18 +5,13 @@
 // as old as it likes. How: the table recorder_times(sequence, boot, monotonic, wall, elapsed, hash) has a row for each
 // boot of the system, which ties its monotonic clock to the seconds that had passed. Between two boots nothing is known
 // to have passed but the new one's uptime, so time never goes faster here than it did; a device that was off for long
-// keeps its events for longer.
-//
-// The wall clock stands beside it, with a further row for each step that it makes, dated back to when it was last seen
-// to go on. So what has the wall clock's time only, as files have, can be told its age; where several ages would be
-// possible it is the least.
+// keeps its events for longer. The wall clock stands beside it for people.
 //
 // Threads: those of the file.
 #pragma once
 
 #include <string>
 #include <utility>
-#include <vector>
 
 #include "platform/Clock.h"
 #include "plist/Result.h"
@@ -32,40 +27,24 @@ class RecorderTime {
   // Goes on from what the file has noted, and notes where it does.
   [[nodiscard]] Status open(Connection& connection);
   double seconds() const noexcept;
-  // When that time of the wall clock was, at the latest; for one before all that is noted the time of the first note.
-  double secondsAt(double wall) const noexcept;
-  // Notes a step of the wall clock since the last look, in a transaction of its own.
-  [[nodiscard]] Status keep(Connection& connection);
 
   // The kernel's own name for this boot.
   static std::string currentBoot();
 
  private:
-  struct Moment {
-    double monotonic = 0;
-    double wall = 0;
-  };
   struct Noted {
     bool sameBoot = false;
     double seconds = 0;  // that had passed when it was noted, or until now when it is of this boot
-    Moment last;
-  };
-  struct Tie {
-    double wall;
-    double seconds;
   };
 
-  [[nodiscard]] Result<Noted> readNoted(Connection& connection);
-  [[nodiscard]] Status note(Connection& connection, const Moment& moment);
+  [[nodiscard]] Result<Noted> readNoted(Connection& connection) const;
+  [[nodiscard]] Status note(Connection& connection) const;
   double monotonic() const noexcept;
-  Moment now() const { return {monotonic(), clock_.epochSeconds()}; }
 
   const platform::Clock& clock_;
   const std::string boot_;
   double base_ = 0;  // seconds() less the monotonic clock
   bool begun_ = false;
-  Moment seen_;            // at the last look at the wall clock
-  std::vector<Tie> ties_;  // in the order of their noting
 };
 
 }  // namespace tarn::recorder
