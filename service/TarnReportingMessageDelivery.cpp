@@ -42,7 +42,7 @@ void improve(TarnReportingOutcome& outcome, TarnReportingOutcome another) {
 }  // namespace
 
 void TarnReportingMessageDelivery::begin(std::int32_t processIdentifier,
-                                         std::weak_ptr<TarnReportingServiceDelegateProtocol> service) {
+                                         const std::weak_ptr<TarnReportingServiceDelegateProtocol>& service) {
   plist::Array storage;
   kLog(LogLevel::Debug, "sending message for reporter %@", [&] { return textOf(search_.reporterIDs, storage); });
   TarnReportingFacilities().tracePoints.emit(kTraceSend, processIdentifier);

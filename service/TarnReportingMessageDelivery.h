@@ -25,8 +25,8 @@ class TarnReportingMessageDelivery {
   TarnReportingMessageDelivery& operator=(TarnReportingMessageDelivery&&) = default;
 
   std::uint32_t category() const noexcept { return category_; }
-  // Nothing is done where the service is gone; the reply then tells so by its end.
-  void begin(std::int32_t processIdentifier, std::weak_ptr<TarnReportingServiceDelegateProtocol> service);
+  // Delivers it, and replies at the end: with an error where the service is gone or reporting is disabled.
+  void begin(std::int32_t processIdentifier, const std::weak_ptr<TarnReportingServiceDelegateProtocol>& service);
 
  private:
   void proceed(const std::weak_ptr<TarnReportingServiceDelegateProtocol>& delegate);
