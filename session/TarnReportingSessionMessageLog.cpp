@@ -11,8 +11,10 @@ std::uint64_t keyOf(AudioEventCategory category, AudioEventType type) {
 }  // namespace
 
 void TarnReportingSessionMessageLog::append(Record record) {
-  newest_[keyOf(record->category(), record->type())] = record.get();
+  // The place first: what points to the record must not outlive one that found no room.
+  const TarnReportingSessionMessage*& newest = newest_[keyOf(record->category(), record->type())];
   messages_.push_back(std::move(record));
+  newest = messages_.back().get();
 }
 
 void TarnReportingSessionMessageLog::sort() {
