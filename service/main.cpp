@@ -3,9 +3,12 @@
 // A signal ends the clients in order, with their sessions. The process then ends without tearing the parts down: what
 // the back-ends hold is committed, then it exits at once.
 #include <cstdint>
+#include <cstdio>
 #include <cstdlib>
+#include <exception>
 #include <iostream>
 #include <memory>
+#include <new>
 #include <string>
 #include <utility>
 
@@ -35,6 +38,12 @@ int refuse(const std::string& complaint, std::int64_t exitStatus = kExitFailure)
   return static_cast<int>(exitStatus);
 }
 
+// Of memory or threads.
+int refuseForWantOf(const std::exception& shortage) {
+  const bool isMemory = dynamic_cast<const std::bad_alloc*>(&shortage) != nullptr;
+  return refuse(isMemory ? "out of memory" : shortage.what());
+}
+
 std::shared_ptr<TarnReportingService> makeService(platform::Log& log) {
   TarnReportingSession::setAllWorkerClasses(TarnReportingWorkerClasses());
   std::shared_ptr<TarnReportingService> service = TarnReportingService::create();
@@ -58,6 +67,16 @@ ServiceCounts countsOf(const TarnReportingService& service) {
   return counts;
 }
 
+// Keys and tables are made before main(); where memory is missing for one of them, that ends the process in one line.
+struct EndBeforeMain {
+  [[noreturn]] static void end() noexcept {
+    static_cast<void>(std::fputs("tarnreportingd: out of memory before its start\n", stderr));
+    std::_Exit(kExitFailure);
+  }
+  std::terminate_handler usual = std::set_terminate(&end);
+};
+const EndBeforeMain endBeforeMain __attribute__((init_priority(101)));
+
 // Serves until a signal; the exit status.
 int serve(LinuxPlatform& platform, HostSetup& setup) {
   MainLoop& loop = platform.loop();
@@ -78,11 +97,8 @@ int serve(LinuxPlatform& platform, HostSetup& setup) {
   return kExitSuccess;
 }
 
-}  // namespace
-}  // namespace tarn
-
-int main(int argumentCount, char** arguments) {
-  using namespace tarn;
+// The exit status.
+int run(int argumentCount, char** arguments) {
   const ServiceCommand command = parseServiceCommand(argumentCount, arguments, HostEnvironment::current());
   std::cout << command.output << std::flush;
   if (command.usage.failed()) return refuse(command.usage->text, command.usage->code);
@@ -94,7 +110,24 @@ int main(int argumentCount, char** arguments) {
   ServiceManager serviceManager;
   LinuxPlatform platform(setup.configuration, command.options->stateDirectory, setup.deviceProperties,
                          {setup.clock, *setup.log, serviceManager, [&setup] { setup.settleLog(); }});
-  const int status = serve(platform, setup);
+  int status = kExitFailure;
+  try {
+    status = serve(platform, setup);
+  } catch (const std::exception& shortage) {  // before anybody can connect
+    refuseForWantOf(shortage);
+  }
   setup.settleLog();
   std::_Exit(status);  // other threads still use the platform's parts
+}
+
+}  // namespace
+}  // namespace tarn
+
+int main(int argumentCount, char** arguments) {
+  std::set_terminate(tarn::endBeforeMain.usual);
+  try {
+    return tarn::run(argumentCount, arguments);
+  } catch (const std::exception& shortage) {
+    return tarn::refuseForWantOf(shortage);
+  }
 }

@@ -12,12 +12,14 @@
 // it is served on and on. Who comes anew and owes nothing is served ahead of the user's others, so that a request now
 // and then doesn't wait for a thousand connections that are busy all the time; every few turns one of those is served.
 //
+// Taking a place in a line needs no memory: each holder and each user brings its own along.
+//
 // Owned by ConnectionHost. Threads: the main loop's.
 #pragma once
 
 #include <cstddef>
 #include <cstdint>
-#include <deque>
+#include <list>
 #include <memory>
 #include <unordered_map>
 
@@ -33,7 +35,7 @@ struct MessageRate {
 
 // What one user's connections have in common.
 struct ShareParty {
-  explicit ShareParty(std::uint32_t theUser) noexcept : user(theUser) {}
+  explicit ShareParty(std::uint32_t theUser) : user(theUser) {}
 
   const std::uint32_t user;
   // What they have, for the quotas.
@@ -44,9 +46,10 @@ struct ShareParty {
 
   std::int64_t credit = 0;
   bool queued = false;
-  std::deque<std::shared_ptr<ShareHolder>> fresh;  // those that have something to do again
-  std::deque<std::shared_ptr<ShareHolder>> seats;  // those that have something to do still
-  int freshTurns = 0;                              // since one of the seats was served
+  std::list<std::shared_ptr<ShareParty>> place{nullptr};  // what stands for it in the line of users, while not in it
+  std::list<std::shared_ptr<ShareHolder>> fresh;          // those that have something to do again
+  std::list<std::shared_ptr<ShareHolder>> seats;          // those that have something to do still
+  int freshTurns = 0;                                     // since one of the seats was served
 };
 
 class ShareHolder {
@@ -56,14 +59,15 @@ class ShareHolder {
     bool more;  // it has more to do
   };
 
-  explicit ShareHolder(std::shared_ptr<ShareParty> party) noexcept : party_(std::move(party)) {}
+  explicit ShareHolder(std::shared_ptr<ShareParty> party) : party_(std::move(party)) {}
   ShareHolder(const ShareHolder&) = delete;
   ShareHolder& operator=(const ShareHolder&) = delete;
   virtual ~ShareHolder() = default;
 
-  // Does what it has to do until that cost `credit` or more, or there is none left.
+  // Does what it has to do until that cost `credit` or more, or there is none left. Throws nothing.
   virtual Turn takeTurn(std::int64_t credit) = 0;
-  // Does at once what was begun or handed over for it, and takes nothing new up; for the end of the process.
+  // Does at once what was begun or handed over for it, and takes nothing new up; for the end of the process. Throws
+  // nothing.
   virtual void finishWork() = 0;
 
  protected:
@@ -75,6 +79,7 @@ class ShareHolder {
   friend class FairShares;
 
   const std::shared_ptr<ShareParty> party_;
+  std::list<std::shared_ptr<ShareHolder>> place_{nullptr};  // what stands for it in a line, while it is in none
   std::int64_t credit_ = 0;
   bool queued_ = false;
 };
@@ -95,7 +100,7 @@ class FairShares {
   // The user's own, shared by all holders that live.
   std::shared_ptr<ShareParty> partyOf(std::uint32_t user);
   // Something came for the holder to do. Cheap when it waits for a turn already.
-  void ready(const std::shared_ptr<ShareHolder>& holder);
+  void ready(const std::shared_ptr<ShareHolder>& holder) noexcept;
   // Gives turns until they cost `budget` or more, or nobody has anything to do. `isOpen` is asked before each turn.
   // Whether somebody is left who could go on at once.
   template <class IsOpen>
@@ -120,9 +125,14 @@ class FairShares {
   }
 
  private:
-  std::int64_t serveOne();
+  using Holders = std::list<std::shared_ptr<ShareHolder>>;
 
-  std::deque<std::shared_ptr<ShareParty>> parties_;  // the one whose visit it is comes first
+  std::int64_t serveOne();
+  static void join(Holders& line, const std::shared_ptr<ShareHolder>& holder) noexcept;
+  static std::shared_ptr<ShareHolder> takeFirst(Holders& line) noexcept;
+  void leave(const std::shared_ptr<ShareParty>& party) noexcept;
+
+  std::list<std::shared_ptr<ShareParty>> parties_;  // the one whose visit it is comes first
   std::unordered_map<std::uint32_t, std::weak_ptr<ShareParty>> byUser_;
 };
 

@@ -9,6 +9,7 @@
 #include "host/log/LogFloodGuard.h"
 #include "host/log/PrefixedLog.h"
 #include "host/ring/ReceivedDescriptors.h"
+#include "host/system/MemoryReserve.h"
 
 namespace tarn::linux_host {
 
@@ -22,8 +23,11 @@ constexpr std::size_t kGatheredReplyBytes = 4096;
 constexpr int kMostFlushesPutOff = 8;
 // Received bytes in a unit of cost.
 constexpr std::size_t kReceivedBytesPerCost = 8192;
-// Of an answer to `status`.
-constexpr std::size_t kStatusCost = 16;
+
+// Made without memory: it is short enough for the string itself.
+std::string outOfMemoryText() noexcept {
+  return std::string(wire::kOutOfMemory);
+}
 
 ucred peerOf(const UniqueDescriptor& socket) {
   ucred peer{.pid = 0, .uid = static_cast<uid_t>(-1), .gid = static_cast<gid_t>(-1)};
@@ -60,9 +64,14 @@ void SocketConnection::resume() {
   state_ = State::Open;
   ++host_.ledger.connectionsOpen;
   ++host_.ledger.connectionsTotal;
-  host_.add(*this);
   ++party().connections;
-  watch(EPOLLIN);
+  const bool listens = MemoryReserve::orGiveUp(MemoryReserve::Loss::Connection, [this] {
+    host_.add(*this);
+    watch(EPOLLIN);
+  });
+  if (!listens && state_ == State::Open) {
+    cut(CutReason::OutOfMemory, outOfMemoryText);
+  }
 }
 
 void SocketConnection::refuse(std::string why) {
@@ -73,15 +82,15 @@ void SocketConnection::refuse(std::string why) {
 // Keeps the system's idea of what to wait for in step; asks it only when something changes.
 void SocketConnection::watch(std::uint32_t events) {
   if (events == watchedEvents_) return;
-  const std::uint32_t before = std::exchange(watchedEvents_, events);
   if (events == 0) {
     host_.loop.unwatch(socket_.get());
-  } else if (before != 0) {
+  } else if (watchedEvents_ != 0) {
     host_.loop.change(socket_.get(), events);
-  } else if (host_.loop.watch(socket_.get(), events, shared_from_this()).failed()) {
-    watchedEvents_ = 0;
-    cut(CutReason::Reset, "can't wait for it" + errorSuffix(errno));
+  } else if (const Status watched = host_.loop.watch(socket_.get(), events, shared_from_this()); watched.failed()) {
+    cut(CutReason::Reset, [&] { return "can't wait for it" + errorSuffix(*watched); });
+    return;
   }
+  watchedEvents_ = events;
 }
 
 void SocketConnection::handleEvents(std::uint32_t events) {
@@ -118,7 +127,11 @@ void SocketConnection::stopAtHead(std::uint32_t events) {
 }
 
 bool SocketConnection::receive() {
-  const auto space = frames_.space();
+  std::span<std::byte> space;
+  if (!MemoryReserve::orGiveUp(MemoryReserve::Loss::Connection, [&] { space = frames_.space(); })) {
+    cut(CutReason::OutOfMemory, outOfMemoryText);
+    return false;
+  }
   const auto size = std::min(space.size(), host_.limits.gulpBytes);
   const ssize_t bytes = receiveWithDescriptors(socket_.get(), space.first(size), descriptors_);
   if (bytes > 0) {
@@ -149,7 +162,11 @@ ShareHolder::Turn SocketConnection::takeTurn(std::int64_t credit) {
   }
   countSessions();
   if (!more) {
-    countWaitingBytes(state_ == State::Open ? frames_.pendingBytes() : 0);
+    const std::size_t half = state_ == State::Open ? frames_.pendingBytes() : 0;
+    if (!MemoryReserve::orGiveUp(MemoryReserve::Loss::Connection, [&] { countWaitingBytes(half); })) {
+      cut(CutReason::OutOfMemory, outOfMemoryText);
+      more = true;
+    }
   }
   return {lane_.spent(), more};
 }
@@ -171,20 +188,25 @@ void SocketConnection::countWaitingBytes(std::size_t half) {
 }
 
 void SocketConnection::endHalfFrame(const std::string& why) {
-  cut(CutReason::StaleFrame, why);
+  cut(CutReason::StaleFrame, [&] { return why; });
 }
 
 void SocketConnection::finishWork() {
   const LogClientScope scope(client_);
   while (!lane_.empty()) {
     lane_.beginTurn(FairShares::kQuantum);
-    host_.loop.queue()->runLane(lane_);
+    runLane();
   }
+}
+
+// A piece that fails has taken its request's reply along, which refused it.
+void SocketConnection::runLane() {
+  MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, [this] { host_.loop.queue()->runLane(lane_); });
 }
 
 bool SocketConnection::serveNext() {
   if (!lane_.empty()) {
-    host_.loop.queue()->runLane(lane_);
+    runLane();
     return true;
   }
   if (state_ != State::Open) return false;
@@ -211,8 +233,10 @@ bool SocketConnection::serveNextFrame() {
       }
       return false;
     case wire::FrameBuffer::Next::Oversize:
-      cut(CutReason::OversizeFrame, "frame of " + std::to_string(frames_.announcedBytes()) + " bytes, " +
-                                        std::to_string(host_.limits.maxFrameBytes) + " are allowed");
+      cut(CutReason::OversizeFrame, [this] {
+        return "frame of " + std::to_string(frames_.announcedBytes()) + " bytes, " +
+               std::to_string(host_.limits.maxFrameBytes) + " are allowed";
+      });
       return true;
   }
   return false;
@@ -222,136 +246,23 @@ void SocketConnection::serveFrame(std::span<const std::byte> frame) {
   ++host_.ledger.framesReceived;
   framesTaken_ = true;
   wire::DecodedRequest& request = host_.request;
-  switch (host_.decoder.decode(frame, request, host_.refusal)) {
+  switch (decode(frame)) {
     case wire::DecodeVerdict::Ok:
       serveRequest(request, frame.size());
       break;
     case wire::DecodeVerdict::Refused:
       lane_.spend(costOf(request, frame.size()));
-      host_.ledger.countRefusal(host_.refusal.code);
-      sendError(request.id, {wire::kErrorDomain, static_cast<std::int64_t>(host_.refusal.code), host_.refusal.text});
+      refuseRequest(request.id, host_.refusal.code, std::move(host_.refusal.text));
       break;
     case wire::DecodeVerdict::Unreadable:
-      cut(CutReason::UnreadableFrame, "unreadable frame: " + host_.refusal.text);
+      cut(CutReason::UnreadableFrame, [this] { return "unreadable frame: " + host_.refusal.text; });
       break;
   }
 }
 
-void SocketConnection::serveRequest(wire::DecodedRequest& request, std::size_t frameBytes) {
-  if (peerGone_ && onlyAsks(request.operation)) {
-    lane_.spend(1);
-    ++host_.ledger.questionsDropped;
-    return;
-  }
-  if (request.operation == wire::Operation::Status) {
-    // At once: whoever asks how the service is must not wait for its work.
-    lane_.spend(kStatusCost);
-    sendReply(request.id, {host_.status()});
-    return;
-  }
-  if (!refusal_.empty()) {
-    refuseRequest(request.id, refusal_);
-    return;
-  }
-  if (request.operation == wire::Operation::OpenRing || request.operation == wire::Operation::DeclareShape) {
-    lane_.spend(costOf(request, frameBytes));
-    serveRingOperation(request);
-    return;
-  }
-  if (!host_.gate.open()) {
-    hold(request, frameBytes);
-    return;
-  }
-  lane_.spend(costOf(request, frameBytes));
-  if (request.operation == wire::Operation::SendMessage) {
-    ++host_.ledger.messagesReceived;
-  }
-  if (const std::string why = quotaRefusal(request); !why.empty()) [[unlikely]] {
-    host_.ledger.messagesOverQuota += request.operation == wire::Operation::SendMessage ? 1 : 0;
-    refuseRequest(request.id, why);
-  } else if (request.operation == wire::Operation::Settle) {
-    settle(request.id);
-  } else {
-    const WorkLane::Scope scope(&lane_);
-    dispatchRequest(request, *object_, weak_from_this());
-  }
-}
-
-// The request stays here until it can be served. Only one of a connection does, but there may be many connections.
-void SocketConnection::hold(wire::DecodedRequest& request, std::size_t frameBytes) {
-  if (const std::string why = use_.refusalOfWaitingBytes(frameBytes); !why.empty()) {
-    refuseRequest(request.id, why);
-    return;
-  }
-  heldRequest_ = std::move(request);
-  heldBytes_ = frameBytes;
-  host_.gate.countHeld();
-  host_.shares.ready(self());
-  countWaitingBytes(0);
-}
-
-// All that was sent before it is dealt with by now; what that handed over is to be committed.
-void SocketConnection::settle(std::uint64_t id) {
-  host_.settle([sink = weak_from_this(), id] {
-    if (const auto connection = sink.lock()) {
-      connection->sendReply(id, {});
-    }
-  });
-}
-
-std::string SocketConnection::quotaRefusal(const wire::Request& request) {
-  if (request.operation == wire::Operation::SendMessage) {
-    if (!use_.limitsMessages()) return {};
-    const auto now = host_.loop.clock().monotonic();
-    return use_.refusalOfMessage(std::chrono::duration_cast<std::chrono::seconds>(now).count());
-  }
-  if (request.operation == wire::Operation::CreateReportingSession && !object_->hasSession(request.reporterID)) {
-    countSessions();
-    return use_.refusalOfSession();
-  }
-  return {};
-}
-
-void SocketConnection::refuseRequest(std::uint64_t id, const std::string& why) {
-  lane_.spend(1);
-  host_.ledger.countRefusal(wire::ErrorCode::OverQuota);
-  sendError(id, {wire::kErrorDomain, static_cast<std::int64_t>(wire::ErrorCode::OverQuota), why});
-}
-
-void SocketConnection::serveRingOperation(const wire::DecodedRequest& request) {
-  if (rings_ == nullptr) {
-    rings_ = host_.rings.connect(weak_from_this());
-  }
-  if (request.operation == wire::Operation::OpenRing) {
-    const Result<std::uint64_t> opened = rings_->open(std::exchange(descriptors_, {}));
-    answerRingOperation(request.id, opened.value, opened.error);
-  } else {
-    answerRingOperation(request.id, true, rings_->declareShape(request.dictionary));
-  }
-}
-
-void SocketConnection::answerRingOperation(std::uint64_t id, plist::ValueView result, const Status& done) {
-  if (done.ok()) {
-    sendReply(id, {result});
-    return;
-  }
-  host_.ledger.countRefusal(wire::ErrorCode::BadArguments);
-  sendError(id, {wire::kErrorDomain, static_cast<std::int64_t>(wire::ErrorCode::BadArguments), done->text});
-}
-
-// In the connection's own line, after what it sent over the socket before.
-void SocketConnection::serveRingRequest(wire::DecodedRequest& request) {
-  if (request.operation == wire::Operation::SendMessage) {
-    ++host_.ledger.messagesReceived;
-  }
-  const WorkLane::Scope scope(&lane_);
-  dispatchRequest(request, *object_, {});
-  host_.shares.ready(self());
-}
-
-void SocketConnection::afterRingRequests(platform::Work work) {
-  host_.loop.queue()->asyncIn(lane_, std::move(work));
-  host_.shares.ready(self());
+wire::DecodeVerdict SocketConnection::decode(std::span<const std::byte> frame) {
+  const MemoryReserve::Refusable refusable;
+  return host_.decoder.decode(frame, host_.request, host_.refusal);
 }
 
 // The socket then yields what came before and its end, in this order.
@@ -362,12 +273,53 @@ void SocketConnection::endInput() {
 }
 
 template <class Content>
-void SocketConnection::reply(std::uint64_t id, const Content& content) {
+void SocketConnection::reply(std::uint64_t id, const Content& content) noexcept {
   if ((state_ != State::Open && state_ != State::Ending) || output_.broken()) {
     output_.countDropped();
     return;
   }
-  output_.append(id, content);
+  try {
+    output_.append(id, content);
+  } catch (const std::bad_alloc&) {
+    replyShortly(id);
+    return;
+  }
+  flushSoon();
+}
+
+void SocketConnection::refuseRequest(std::uint64_t id, wire::ErrorCode code, std::string why) noexcept {
+  if (code == wire::ErrorCode::OutOfMemory) {
+    MemoryReserve::count(MemoryReserve::Loss::Request);
+  }
+  lane_.spend(1);
+  host_.ledger.countRefusal(code);
+  reply(id, platform::RemoteError{wire::kErrorDomain, static_cast<std::int64_t>(code), std::move(why)});
+}
+
+void SocketConnection::refuseForMemory(std::uint64_t id) noexcept {
+  refuseRequest(id, wire::ErrorCode::OutOfMemory, outOfMemoryText());
+}
+
+// In the place of a reply that is too large for the memory that there is: an error, and without the memory for that the
+// connection's end.
+void SocketConnection::replyShortly(std::uint64_t id) noexcept {
+  const bool appended = MemoryReserve::orGiveUp(MemoryReserve::Loss::Connection, [&] {
+    const platform::RemoteError error{wire::kErrorDomain, static_cast<std::int64_t>(wire::ErrorCode::OutOfMemory),
+                                      outOfMemoryText()};
+    output_.append(id, error);
+  });
+  if (!appended) {
+    output_.countDropped();
+    cut(CutReason::OutOfMemory, outOfMemoryText);
+  } else {
+    MemoryReserve::count(MemoryReserve::Loss::Request);
+    host_.ledger.countRefusal(wire::ErrorCode::OutOfMemory);
+    flushSoon();
+  }
+}
+
+// After a reply was appended.
+void SocketConnection::flushSoon() noexcept {
   const bool waitsForRoom = (watchedEvents_ & EPOLLOUT) != 0;
   if (output_.unsentBytes() > (waitsForRoom ? host_.limits.maxUnreadReplyBytes : kEarlyFlushBytes)) {
     flush();
@@ -413,7 +365,7 @@ void SocketConnection::flush() {
       output_.breakOff();
     }
   } else if (unsent > host_.limits.maxUnreadReplyBytes) {
-    cut(CutReason::UnreadReplies, std::to_string(unsent) + " bytes of replies left unread");
+    cut(CutReason::UnreadReplies, [&] { return std::to_string(unsent) + " bytes of replies left unread"; });
   } else if (unsent != 0) {
     watch(watchedEvents_ | EPOLLOUT);
   } else {
@@ -424,7 +376,7 @@ void SocketConnection::flush() {
 void SocketConnection::peerEnded(bool reset) {
   const std::size_t half = frames_.pendingBytes();
   if (half != 0) {
-    cut(CutReason::HalfFrame, "ended inside a frame, " + std::to_string(half) + " bytes of it came");
+    cut(CutReason::HalfFrame, [&] { return "ended inside a frame, " + std::to_string(half) + " bytes of it came"; });
     return;
   }
   if (reset) {
@@ -433,10 +385,20 @@ void SocketConnection::peerEnded(bool reset) {
   beginEnd(reset);
 }
 
-void SocketConnection::cut(CutReason reason, const std::string& why) {
+template <class Why>
+void SocketConnection::cut(CutReason reason, const Why& why) noexcept {
+  if (state_ != State::Open) {  // it ends already
+    output_.breakOff();
+    return;
+  }
   host_.ledger.countCut(reason);
-  logPrefixed(host_.log, kConnectionCategory, platform::LogLevel::Error, kModule,
-              "cut off " + description() + ": " + why);
+  const bool told = MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, [&] {
+    logPrefixed(host_.log, kConnectionCategory, platform::LogLevel::Error, kModule,
+                "cut off " + description() + ": " + why());
+  });
+  if (!told) {
+    logPrefixed(host_.log, kConnectionCategory, platform::LogLevel::Error, kModule, description_);
+  }
   beginEnd(true);
 }
 
@@ -473,10 +435,10 @@ void SocketConnection::finish(bool interrupted) {
   --host_.ledger.connectionsOpen;
   host_.remove(*this);
   if (auto handler = std::exchange(interruptionHandler_, {}); handler && interrupted) {
-    handler();
+    MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, handler);
   }
   if (auto handler = std::exchange(invalidationHandler_, {})) {
-    handler();
+    MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, handler);
   }
   object_.reset();
   rings_.reset();
