@@ -25,6 +25,7 @@ enum class Word : std::size_t {
   Allocations = 7,        // allocations counted
   ClockOffset = 8,        // nanoseconds that the wall clock is ahead of the real one, signed
   Sequence = 9,           // entries of the journal of writes
+  FailuresInARow = 10,    // allocations that fail from that one on; 0: that one alone
   FirstCounter = 16,      // calls of each kind
 };
 
