@@ -67,15 +67,27 @@ ServiceCounts countsOf(const TarnReportingService& service) {
   return counts;
 }
 
-// Keys and tables are made before main(); where memory is missing for one of them, that ends the process in one line.
-struct EndBeforeMain {
-  [[noreturn]] static void end() noexcept {
-    static_cast<void>(std::fputs("tarnreportingd: out of memory before its start\n", stderr));
-    std::_Exit(kExitFailure);
-  }
+// Until somebody can connect, memory that is missing where nobody can catch that, as for the keys that are made before
+// main(), ends the process in one line.
+struct StartWithoutMemory {
+  [[noreturn]] static void end() noexcept;
   std::terminate_handler usual = std::set_terminate(&end);
 };
-const EndBeforeMain endBeforeMain __attribute__((init_priority(101)));
+const StartWithoutMemory startWithoutMemory __attribute__((init_priority(101)));
+
+void StartWithoutMemory::end() noexcept {
+  try {
+    if (const std::exception_ptr reason = std::current_exception()) {
+      std::rethrow_exception(reason);
+    }
+  } catch (const std::bad_alloc&) {
+    static_cast<void>(std::fputs("tarnreportingd: out of memory\n", stderr));
+    std::_Exit(kExitFailure);
+  } catch (...) {  // what the usual end tells
+  }
+  startWithoutMemory.usual();
+  std::abort();
+}
 
 // Serves until a signal; the exit status.
 int serve(LinuxPlatform& platform, HostSetup& setup) {
@@ -93,6 +105,7 @@ int serve(LinuxPlatform& platform, HostSetup& setup) {
   // Only now is there anything to connect to: who can reach the service finds it whole, its notifications heard.
   const Status listening = platform.listen(std::move(setup.socket), service, [&service] { return countsOf(*service); });
   if (listening.failed()) return refuse(listening->text);
+  std::set_terminate(startWithoutMemory.usual);
   platform.serve();
   return kExitSuccess;
 }
@@ -124,7 +137,6 @@ int run(int argumentCount, char** arguments) {
 }  // namespace tarn
 
 int main(int argumentCount, char** arguments) {
-  std::set_terminate(tarn::endBeforeMain.usual);
   try {
     return tarn::run(argumentCount, arguments);
   } catch (const std::exception& shortage) {
