@@ -108,6 +108,14 @@ function(tarn_test name)
   gtest_discover_tests(${name} DISCOVERY_MODE PRE_TEST DISCOVERY_TIMEOUT 60 PROPERTIES TIMEOUT ${arg_TIMEOUT})
 endfunction()
 
+# tarn_short_memory_tests(PROGRAM file...): tests of that program whose allocations fail when they say so. Not under a
+# sanitizer, which has an allocator of its own.
+function(tarn_short_memory_tests program)
+  if(NOT TARN_SANITIZE)
+    target_sources(${program} PRIVATE ${ARGN} "${PROJECT_SOURCE_DIR}/tests/support/FailingAllocations.cpp")
+  endif()
+endfunction()
+
 # tarn_fuzzer(NAME SOURCES file... [DEPENDS target...]): a fuzzer, whose sources define LLVMFuzzerTestOneInput. With
 # TARN_FUZZ it is a libFuzzer program; with TARN_TESTS a test replays its seeds, which lie in fuzz/corpus/NAME.
 function(tarn_fuzzer name)

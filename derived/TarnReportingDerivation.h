@@ -22,7 +22,7 @@ namespace tarn {
 // What the walk makes of the messages that `isLeftOut(index)` doesn't tell to leave out, in order.
 template <class IsLeftOut, class Walk>
 TarnReportingSessionMessageList TarnReportingDerivedMessages(const TarnReportingSessionMessageList& messages,
-                                                             IsLeftOut isLeftOut, Walk walk) {
+                                                             IsLeftOut isLeftOut, Walk&& walk) {
   for (auto at = messages.begin(); at != messages.end(); ++at) {
     if (at.beginsPage()) {
       walk.keep();
@@ -35,14 +35,15 @@ TarnReportingSessionMessageList TarnReportingDerivedMessages(const TarnReporting
 }
 template <class Walk>
 TarnReportingSessionMessageList TarnReportingDerivedMessages(const TarnReportingSessionMessageList& messages,
-                                                             Walk walk) {
+                                                             Walk&& walk) {
   return TarnReportingDerivedMessages(
-      messages, [](std::size_t) { return false; }, std::move(walk));
+      messages, [](std::size_t) { return false; }, std::forward<Walk>(walk));
 }
 template <class Walk>
-TarnReportingSessionMessageList TarnReportingDerivedMessages(const TarnReportingCombinedMessages& combined, Walk walk) {
+TarnReportingSessionMessageList TarnReportingDerivedMessages(const TarnReportingCombinedMessages& combined,
+                                                             Walk&& walk) {
   return TarnReportingDerivedMessages(
-      combined.all(), [&](std::size_t index) { return combined.isMerged(index); }, std::move(walk));
+      combined.all(), [&](std::size_t index) { return combined.isMerged(index); }, std::forward<Walk>(walk));
 }
 
 // Derives messages from a session (`derive(session)`) and sends them into it, in order. Before the first, `sendingText`

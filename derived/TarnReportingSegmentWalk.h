@@ -89,7 +89,10 @@ class TarnReportingSegmentWalk {
 
   TarnReportingSessionMessageList finish() {
     TarnReportingNumberMessages(derived_);
-    return std::move(derived_);
+    // A list is made, which may fail, and then moved into: making one of another can't tell that there was no memory.
+    TarnReportingSessionMessageList finished;
+    finished = std::move(derived_);
+    return finished;
   }
 
  private:

@@ -160,7 +160,10 @@ void LagoonWalk::keep() {
 
 TarnReportingSessionMessageList LagoonWalk::finish() {
   TarnReportingNumberMessages(derived_);
-  return std::move(derived_);
+  // A list is made, which may fail, and then moved into: making one of another can't tell that there was no memory.
+  TarnReportingSessionMessageList finished;
+  finished = std::move(derived_);
+  return finished;
 }
 
 }  // namespace

@@ -45,6 +45,7 @@ TarnReportingSessionSystemMonitorWorker::~TarnReportingSessionSystemMonitorWorke
 
 bool TarnReportingSessionSystemMonitorWorker::start() {
   if (!systemMonitorDictionary_) return true;
+  observers_.reserve(featureKeys_.size());  // one that couldn't be kept would never be removed
   for (const plist::Key& feature : featureKeys_) {
     plist::Dictionary state;
     {

@@ -1,7 +1,10 @@
 #include "host/LinuxPlatform.h"
 
 #include <algorithm>
+#include <array>
+#include <cerrno>
 #include <chrono>
+#include <cstdio>
 #include <cstdlib>
 #include <limits>
 #include <utility>
@@ -10,6 +13,7 @@
 #include "host/loop/Settling.h"
 #include "host/system/DescriptorLimit.h"
 #include "host/system/Files.h"
+#include "host/system/MemoryReserve.h"
 #include "host/system/SystemError.h"
 
 namespace tarn::linux_host {
@@ -20,6 +24,14 @@ constexpr std::string_view kModule = "LinuxPlatform";
 // What a commit to a slow disk may take, as it is told to the service manager.
 constexpr std::chrono::seconds kLongestCommit{15};
 constexpr std::chrono::seconds kLongestFlush{10};
+// A shortage is told once in this time.
+constexpr std::chrono::seconds kBetweenTellings{1};
+
+// For what is done also when memory is missing for one part of it.
+template <class Work>
+void tryTo(Work&& work) {
+  MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, std::forward<Work>(work));
+}
 
 HostLimits withinTheSystem(HostLimits limits) {
   limits.maxConnections = std::min(limits.maxConnections, connectionsWithin(raiseDescriptorLimit()));
@@ -33,6 +45,15 @@ recorder::RecorderOptions recorderOptions(const HostConfiguration& configuration
   const std::string logs = configuration.paths.diagnosticLogs.value_or(stateDirectory) + "/DiagnosticLogs/Audio/";
   options.folders = {logs + "Reporting", logs + "Traces"};
   return options;
+}
+
+plist::Dictionary lossStatus() {
+  using Loss = MemoryReserve::Loss;
+  const MemoryReserve::Counts counts = MemoryReserve::counts();
+  return {{"requests_refused", counts.of(Loss::Request)},
+          {"connections_closed", counts.of(Loss::Connection)},
+          {"work_given_up", counts.of(Loss::Work)},
+          {"reserve_blocks_used", counts.blocksUsed}};
 }
 
 // The source that only some devices have beside the files'.
@@ -95,11 +116,14 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
   connections_.gate.setPauseSource([this] { return recorder_.isFull() || workQueues_.isFull(); });
   connections_.gate.setCrowdSource([this] { return recorder_.isCrowded(); });
   loop_.addTurnHook([this] { lookForTheEnd(); });
+  loop_.addTurnHook([this] { tellLosses(); });
   if (recorderEnabled_) {
     // What was sent may still be on its way through the workers' own queues.
     connections_.setSettleSource([this](platform::Work done) {
       workQueues_.afterWhatIsUnfinished(
-          [this, done = std::move(done)]() mutable { recorder_.settle(loop_.queue(), std::move(done)); });
+          [this, settlement = recorder::Recorder::settlement(loop_.queue(), std::move(done))]() mutable {
+            recorder_.settle(std::move(settlement));
+          });
     });
   }
 }
@@ -141,6 +165,10 @@ Status LinuxPlatform::start() {
   if (const Status made = createDirectories(temporaryDirectory_, 0750); made.failed()) {
     return errorOf(temporaryDirectory_, *made);
   }
+  // Threads and memory that the service needs when the system may have none left.
+  if (!MemoryReserve::hold()) return Error{ENOMEM, "no memory to keep in reserve"};
+  if (!workQueues_.start()) return Error{EAGAIN, "no threads to run on"};
+  endDeadline_.prepare([this] { giveUpClients(); });
   if (recorderEnabled_) {
     recorder_.start();
     // A large file is read through first; until that is over nothing could be committed in time.
@@ -168,10 +196,12 @@ Status LinuxPlatform::listen(ListenSocket socket, const std::shared_ptr<platform
 void LinuxPlatform::endClients(platform::UniqueFunction<void()> clientsAreGone) {
   if (std::exchange(ending_, true)) return;
   serviceManager_.notifyStopping(endTime_);
-  logPrefixed(log_, kHostCategory, platform::LogLevel::Default, kModule,
-              "ending: " + std::to_string(connections_.ledger.connectionsOpen) + " connections are open");
+  tryTo([this] {
+    logPrefixed(log_, kHostCategory, platform::LogLevel::Default, kModule,
+                "ending: " + std::to_string(connections_.ledger.connectionsOpen) + " connections are open");
+  });
   clientsAreGone_ = std::move(clientsAreGone);
-  endDeadline_.start(endTime_, [this] { giveUpClients(); });
+  endDeadline_.start(endTime_);
   listener_->close();
   connections_.endInputs();
 }
@@ -179,19 +209,38 @@ void LinuxPlatform::endClients(platform::UniqueFunction<void()> clientsAreGone) 
 // Once a turn: when the last client's end was served, the loop may stop.
 void LinuxPlatform::lookForTheEnd() {
   if (!clientsAreGone_ || connections_.ledger.connectionsOpen != 0 || loop_.queue()->waiting() != 0) return;
-  // As work of the queue, which is where sessions are stopped.
-  loop_.queue()->async([this, gone = std::exchange(clientsAreGone_, {})]() mutable {
-    gone();
+  // As work of the queue, which is where sessions are stopped. The loop stops whatever comes of that.
+  loop_.queue()->async([this] {
+    tryTo(std::exchange(clientsAreGone_, {}));
     loop_.stop();
   });
+}
+
+// Once a turn: what was given up for want of memory, and how much of the reserve was needed, in one line.
+void LinuxPlatform::tellLosses() {
+  using Loss = MemoryReserve::Loss;
+  const MemoryReserve::Counts now = MemoryReserve::counts();
+  if (now == told_ || clock_.monotonic() < nextTelling_) return;
+  const MemoryReserve::Counts before = std::exchange(told_, now);
+  nextTelling_ = clock_.monotonic() + kBetweenTellings;
+  const auto since = [&](Loss loss) { return static_cast<unsigned long long>(now.of(loss) - before.of(loss)); };
+  std::array<char, 256> text{};
+  static_cast<void>(std::snprintf(text.data(), text.size(),
+                                  "out of memory: %llu requests refused, %llu connections closed, %llu pieces of work "
+                                  "given up, %llu blocks of the reserve used",
+                                  since(Loss::Request), since(Loss::Connection), since(Loss::Work),
+                                  static_cast<unsigned long long>(now.blocksUsed - before.blocksUsed)));
+  logPrefixed(log_, kHostCategory, platform::LogLevel::Error, kModule, text.data());
 }
 
 // On a thread of its own, while the loop's may be stuck in somebody's work: only what any thread may do.
 void LinuxPlatform::giveUpClients() {
   serviceManager_.notifyStopping(kLongestCommit);
-  logPrefixed(
-      log_, kHostCategory, platform::LogLevel::Error, kModule,
-      "the clients' ends are not served within " + std::to_string(endTime_.count()) + " ms; what is left is dropped");
+  tryTo([this] {
+    logPrefixed(
+        log_, kHostCategory, platform::LogLevel::Error, kModule,
+        "the clients' ends are not served within " + std::to_string(endTime_.count()) + " ms; what is left is dropped");
+  });
   if (!recorder_.flush(kLongestFlush)) {
     logPrefixed(log_, kHostCategory, platform::LogLevel::Error, kModule, "not everything could be committed");
   }
@@ -204,7 +253,7 @@ void LinuxPlatform::giveUpClients() {
 void LinuxPlatform::serve() {
   loop_.run();
   endDeadline_.cancel();
-  loop_.queue()->run(std::numeric_limits<std::size_t>::max());
+  tryTo([this] { loop_.queue()->run(std::numeric_limits<std::size_t>::max()); });
   connections_.shares.finishWork();  // requests that were taken are served
   loop_.flushAll();
   end();
@@ -224,17 +273,18 @@ plist::Dictionary LinuxPlatform::status() {
                                  {counters.handedOver, counters.committed, counters.waiting, counters.expired,
                                   counters.failed, counters.lostBefore});
   status.set("quotas", quotaStatus(connections_.limits.quotas, connections_.shares));
+  status.set("out_of_memory", lossStatus());
   return status;
 }
 
-// Takes no more, and makes safe what was taken.
+// Takes no more, and makes safe what was taken, also where memory is missing for one part of that.
 void LinuxPlatform::end() {
   endDeadline_.cancel();  // of one that is killed while it ends
   serviceManager_.notifyStopping(kLongestCommit);
   watchdog_.stop();
   listener_->close();
-  settleQueues();
-  performanceTrace_.shutdown();  // a trace that isn't finished leaves no half file
+  tryTo([this] { settleQueues(); });
+  tryTo([this] { performanceTrace_.shutdown(); });  // a trace that isn't finished leaves no half file
   recorder_.shutdown();
   if (settleLog_) {
     settleLog_();

@@ -36,6 +36,7 @@
 #include "host/settings/JsonDeviceProperties.h"
 #include "host/socket/ConnectionHost.h"
 #include "host/socket/SocketListener.h"
+#include "host/system/MemoryReserve.h"
 #include "host/traces/LinuxPerfDataWriters.h"
 #include "host/traces/LinuxPerformanceTraceService.h"
 #include "host/traces/LinuxSignposts.h"
@@ -100,6 +101,7 @@ class LinuxPlatform final : private platform::ProcessControl {
   platform::Facilities facilitiesOf();
   plist::Dictionary status();
   void lookForTheEnd();
+  void tellLosses();
   void giveUpClients();
   void end();
   void settleQueues();
@@ -147,6 +149,8 @@ class LinuxPlatform final : private platform::ProcessControl {
   std::shared_ptr<SocketListener> listener_;
   platform::UniqueFunction<void()> clientsAreGone_;  // set while the clients' ends are served
   bool ending_ = false;
+  MemoryReserve::Counts told_ = MemoryReserve::counts();
+  std::chrono::nanoseconds nextTelling_{};
   Deadline endDeadline_;
   const platform::Facilities facilities_;
 };

@@ -10,6 +10,9 @@
 
 namespace tarn::platform {
 
+// What is written in the place of a line that there was no memory to form.
+inline constexpr std::string_view kNoMemoryForLine = "out of memory for this line";
+
 // Appends "%25s:%-5d ".
 inline void appendLogPrefix(std::string& out, std::string_view module, int line) {
   constexpr std::size_t kModuleWidth = 25;

@@ -69,6 +69,19 @@ KeyList keysWith(KeyList list, std::span<const Key* const> added) {
   return *KeyList::make(std::span<const Key* const>(all));
 }
 
+// A packed container, which is counted already and on its way into a block; without arriving there it is released.
+class HeldContainer {
+ public:
+  explicit HeldContainer(std::span<const std::byte> packed) noexcept : packed_(packed) {}
+  HeldContainer(const HeldContainer&) = delete;
+  HeldContainer& operator=(const HeldContainer&) = delete;
+  ~HeldContainer() { detail::releaseContainers(packed_.data(), packed_.data() + packed_.size()); }
+  void handOver() noexcept { packed_ = {}; }
+
+ private:
+  std::span<const std::byte> packed_;
+};
+
 // A block of these values, copied as they are packed, without a key list.
 Body* bodyOfPacked(std::span<const std::byte* const> values, bool holdsContainers) {
   std::size_t bytes = 0;
@@ -190,15 +203,16 @@ static Body* splice(Body* body, std::size_t offset, std::size_t removed, std::sp
     detail::releaseDictionaryBody(body);
     return copy;
   }
+  // The room first, or a block that can't get it would hold what was released.
+  if (bytes > body->bytes) {
+    body = detail::growBody(body, bytes);
+  }
   if (body->holdsContainers != 0) {
     detail::releaseContainers(body->data() + offset, body->data() + offset + removed);
   }
-  if (bytes > body->bytes) {
-    body = detail::resizeBody(body, bytes);
-  }
   std::memmove(body->data() + offset + packed.size(), body->data() + offset + removed, tail);
   if (bytes < body->bytes) {
-    body = detail::resizeBody(body, bytes);
+    body = detail::shrinkBody(body, bytes);
   }
   if (!packed.empty()) {
     std::memcpy(body->data() + offset, packed.data(), packed.size());
@@ -215,12 +229,13 @@ void Dictionary::set(const Key& key, const ValueView& value) {
   std::byte* const packed = large.empty() ? small.data() : large.data();
   Packed::write(packed, value);
   const bool container = isContainer(value);
+  HeldContainer held(container ? std::span<const std::byte>(packed, size) : std::span<const std::byte>());
 
   if (body_ == nullptr) {
     KeyList list = KeyList().appending(key);
-    body_ = detail::makeBody(0);
+    body_ = detail::makeBody(size);
     body_->keys = std::exchange(list.body_, nullptr);
-    body_ = splice(body_, 0, 0, {packed, size});
+    std::memcpy(body_->data(), packed, size);
   } else if (const std::size_t index = detail::indexInKeyList(body_->keys, key); index != KeyList::npos) {
     const std::byte* const at = itemAt(*body_, index);
     body_ = splice(body_, static_cast<std::size_t>(at - body_->data()), Packed::sizeAt(at), {packed, size});
@@ -232,6 +247,7 @@ void Dictionary::set(const Key& key, const ValueView& value) {
   if (container) {
     body_->holdsContainers = 1;
   }
+  held.handOver();
 }
 
 bool Dictionary::remove(const Key& key) {

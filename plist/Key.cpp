@@ -3,9 +3,11 @@
 #include <atomic>
 #include <cstdlib>
 #include <cstring>
+#include <memory>
 #include <new>
 #include <unordered_map>
 
+#include "plist/Allocation.h"
 #include "plist/KeyText.h"
 #include "plist/ThreadSafety.h"
 
@@ -50,8 +52,7 @@ Table& table() {
 }
 
 detail::KeyText* makeText(std::string_view text) {
-  void* memory = std::malloc(sizeof(detail::KeyText) + text.size());
-  if (memory == nullptr) throw std::bad_alloc();
+  void* memory = detail::allocate(sizeof(detail::KeyText) + text.size());
   auto* made = ::new (memory) detail::KeyText{
       {1}, static_cast<std::uint32_t>(text.size()), Key::hashOf(text), text.find(' ') != std::string_view::npos};
   if (!text.empty()) {
@@ -59,6 +60,10 @@ detail::KeyText* makeText(std::string_view text) {
   }
   return made;
 }
+
+struct FreeText {
+  void operator()(detail::KeyText* text) const noexcept { std::free(text); }
+};
 
 }  // namespace
 
@@ -71,9 +76,9 @@ KeyText* internText(std::string_view text) {
     found->second->references.fetch_add(1, std::memory_order_relaxed);
     return found->second;
   }
-  KeyText* made = makeText(text);
-  all.texts.emplace(made->text(), made);
-  return made;
+  std::unique_ptr<KeyText, FreeText> made(makeText(text));
+  all.texts.emplace(made->text(), made.get());
+  return made.release();
 }
 
 void releaseText(KeyText* text) noexcept {

@@ -2,11 +2,13 @@
 
 #include <algorithm>
 #include <cstdlib>
+#include <memory>
 #include <new>
 #include <unordered_map>
 #include <unordered_set>
 #include <vector>
 
+#include "plist/Allocation.h"
 #include "plist/KeyListBody.h"
 #include "plist/KeyText.h"
 #include "plist/ThreadSafety.h"
@@ -37,17 +39,17 @@ std::size_t indexSlots(std::size_t count) {
   return slots;
 }
 
-void buildIndex(KeyListBody* body) {
-  if (body->count <= kLinearLimit) return;
-  const std::size_t slots = indexSlots(body->count);
-  body->index = std::make_unique<std::uint32_t[]>(slots);
-  body->indexMask = slots - 1;
-  for (std::uint32_t i = 0; i < body->count; ++i) {
-    std::size_t slot = body->keys()[i].hash() & body->indexMask;
-    while (body->index[slot] != 0) {
-      slot = (slot + 1) & body->indexMask;
+void buildIndex(KeyListBody& body) {
+  if (body.count <= kLinearLimit) return;
+  const std::size_t slots = indexSlots(body.count);
+  body.index = std::make_unique<std::uint32_t[]>(slots);
+  body.indexMask = slots - 1;
+  for (std::uint32_t i = 0; i < body.count; ++i) {
+    std::size_t slot = body.keys()[i].hash() & body.indexMask;
+    while (body.index[slot] != 0) {
+      slot = (slot + 1) & body.indexMask;
     }
-    body->index[slot] = i + 1;
+    body.index[slot] = i + 1;
   }
 }
 
@@ -85,11 +87,15 @@ void destroyBody(KeyListBody* body) noexcept {
   std::free(body);
 }
 
-KeyListBody* makeBody(std::span<const Key> head, const Key* last, std::uint64_t hash) {
+struct DestroyBody {
+  void operator()(KeyListBody* body) const noexcept { destroyBody(body); }
+};
+using OwnBody = std::unique_ptr<KeyListBody, DestroyBody>;
+
+OwnBody makeBody(std::span<const Key> head, const Key* last, std::uint64_t hash) {
   const std::size_t count = head.size() + (last != nullptr ? 1 : 0);
-  void* memory = std::malloc(sizeof(KeyListBody) + count * sizeof(Key));
-  if (memory == nullptr) throw std::bad_alloc();
-  auto* body = ::new (memory) KeyListBody{};
+  void* memory = detail::allocate(sizeof(KeyListBody) + count * sizeof(Key));
+  OwnBody body(::new (memory) KeyListBody{});
   body->references = 1;
   body->count = static_cast<std::uint32_t>(count);
   body->hash = hash;
@@ -99,7 +105,7 @@ KeyListBody* makeBody(std::span<const Key> head, const Key* last, std::uint64_t 
   }
   const std::span<const Key> all(body->keys(), count);
   body->hasBlanks = std::any_of(all.begin(), all.end(), [](const Key& key) { return key.hasBlank(); });
-  buildIndex(body);
+  buildIndex(*body);
   return body;
 }
 
@@ -126,9 +132,9 @@ KeyListBody* internList(std::span<const Key> head, const Key* last, std::uint64_
            (last == nullptr || body.keys()[count - 1] == *last);
   });
   if (found != nullptr) return found;
-  KeyListBody* made = makeBody(head, last, hash);
-  all.lists.emplace(hash, made);
-  return made;
+  OwnBody made = makeBody(head, last, hash);
+  all.lists.emplace(hash, made.get());
+  return made.release();
 }
 
 std::uint64_t hashOfKeys(std::span<const Key> keys) {

@@ -5,6 +5,7 @@
 #include <new>
 #include <stdexcept>
 
+#include "plist/Allocation.h"
 #include "plist/Dictionary.h"
 
 namespace tarn::plist {
@@ -28,20 +29,26 @@ void checkSize(std::size_t bytes) {
 
 Body* makeBody(std::size_t bytes) {
   checkSize(bytes);
-  void* memory = std::malloc(allocationFor(bytes));
-  if (memory == nullptr) throw std::bad_alloc();
+  void* memory = allocate(allocationFor(bytes));
   Body* body = ::new (memory) Body{{1}, 0, 0, {nullptr}};
   body->bytes = static_cast<std::uint32_t>(bytes) & 0x7FFFFFFFU;
   return body;
 }
 
-Body* resizeBody(Body* body, std::size_t bytes) {
+Body* growBody(Body* body, std::size_t bytes) {
   checkSize(bytes);
   if (allocationFor(bytes) != allocationFor(body->bytes)) {
     // A block holds plain bytes and a counter that nobody else looks at now, so it may be moved as bytes.
-    void* memory = std::realloc(static_cast<void*>(body), allocationFor(bytes));
-    if (memory == nullptr) throw std::bad_alloc();
-    body = static_cast<Body*>(memory);
+    body = static_cast<Body*>(allocate(allocationFor(bytes), static_cast<void*>(body)));
+  }
+  body->bytes = static_cast<std::uint32_t>(bytes) & 0x7FFFFFFFU;
+  return body;
+}
+
+Body* shrinkBody(Body* body, std::size_t bytes) noexcept {
+  if (allocationFor(bytes) != allocationFor(body->bytes)) {
+    void* const memory = std::realloc(static_cast<void*>(body), allocationFor(bytes));
+    body = memory != nullptr ? static_cast<Body*>(memory) : body;  // a larger block will do as well
   }
   body->bytes = static_cast<std::uint32_t>(bytes) & 0x7FFFFFFFU;
   return body;

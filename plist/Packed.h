@@ -32,8 +32,10 @@ static_assert(sizeof(Body) == 16);
 
 // Makes a block with room for `bytes` packed bytes and one reference; the caller fills it.
 Body* makeBody(std::size_t bytes);
-// Gives a block that nobody shares room for `bytes`; it may move.
-Body* resizeBody(Body* body, std::size_t bytes);
+// Gives a block that nobody shares room for `bytes`; it may move. Without the memory for it it stays as it is.
+Body* growBody(Body* body, std::size_t bytes);
+// The same with less room.
+Body* shrinkBody(Body* body, std::size_t bytes) noexcept;
 void freeBody(Body* body) noexcept;
 inline void retainBody(Body* body) noexcept {
   if (body != nullptr) {

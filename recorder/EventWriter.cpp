@@ -273,6 +273,7 @@ Status EventWriter::maintainOnce() {
 }
 
 bool EventWriter::resolve(const Error& error) {
+  lacksMemory_ = isShortage(error.code);
   switch (remedyFor(error.code)) {
     case Remedy::Moved:
       log_.error("recorder file " + file_.path().string() + " was taken away (" + error.text +
@@ -301,10 +302,10 @@ bool EventWriter::resolveDamage(const Error& error) {
     return false;
   }
   suspected_ = false;
-  log_.error("recorder file " + file_.path().string() + " can't be used (" + error.text + "); it is set aside as " +
-             aside.value.filename().string() + " and a fresh one is begun");
   const auto upTo = file_.isInDoubt() ? std::optional(file_.lastId()) : std::nullopt;
   carrying_ = std::make_unique<CarryOver>(aside.value, upTo);
+  log_.error("recorder file " + file_.path().string() + " can't be used (" + error.text + "); it is set aside as " +
+             aside.value.filename().string() + " and a fresh one is begun");
   return true;
 }
 

@@ -49,11 +49,16 @@ class EventWriter {
   void expect(std::int64_t lastId) noexcept { file_.expect(lastId); }
   std::int64_t lastId() const noexcept { return file_.lastId(); }
   void close() noexcept { file_.close(); }
+  // After something else than the file failed in the middle of any of these: the next one opens the file again and
+  // finds out what is in it.
+  void closeAfterFault() noexcept { file_.closeAfterFault(); }
 
   bool hasMoreToExpire() const noexcept { return file_.hasMoreToExpire(); }
   bool hasMoreToBringIn() const noexcept { return file_.isOpen() && file_.hasMoreToBringIn(); }
   std::uint64_t expired() const noexcept { return file_.expired(); }
   const std::string& problem() const noexcept { return problem_; }
+  // Whether it was for want of memory.
+  bool lacksMemory() const noexcept { return lacksMemory_; }
 
  private:
   [[nodiscard]] Status openOnce();
@@ -83,6 +88,7 @@ class EventWriter {
   std::unique_ptr<CarryOver> carrying_;  // out of a file that was set aside, while that isn't over
   std::optional<IdRange> missing_;       // to be noted
   std::string problem_;                  // of the last failure
+  bool lacksMemory_ = false;
   bool longLogTold_ = false;
   bool faulty_ = false;
   bool suspected_ = false;  // the file was found unusable once

@@ -3,7 +3,7 @@
 namespace tarn::recorder {
 
 void LateReplies::close() {
-  std::deque<platform::Work> dropped;  // destroyed after the lock: each may hold the last of something
+  std::list<platform::Work> dropped;  // destroyed after the lock: each may hold the last of something
   const MutexLock lock(line_->mutex);
   line_->closed = true;
   dropped.swap(line_->waiting);
@@ -18,10 +18,15 @@ void LateReplies::enqueue(platform::Work reply) {
   }
   line_->waiting.push_back(std::move(reply));
   const auto answer = [line = line_] { line->answerNext(); };
-  if (manner_.delay == std::chrono::nanoseconds::zero()) {
-    queue_->async(answer);
-  } else {
-    queue_->asyncAfter(manner_.delay, answer);
+  try {
+    if (manner_.delay == std::chrono::nanoseconds::zero()) {
+      queue_->async(answer);
+    } else {
+      queue_->asyncAfter(manner_.delay, answer);
+    }
+  } catch (...) {
+    line_->waiting.pop_back();
+    throw;
   }
 }
 
@@ -35,11 +40,18 @@ void LateReplies::Line::answerNext() {
     waiting.pop_front();
     answering = true;
   }
-  reply();
-  reply.reset();
-  const MutexLock lock(mutex);
-  answering = false;
-  answered.notifyAll();
+  // Whoever closes waits for this one, also when it fails.
+  struct Answering {
+    Line& line;
+    ~Answering() {
+      const MutexLock lock(line.mutex);
+      line.answering = false;
+      line.answered.notifyAll();
+    }
+  };
+  const Answering thisOne{*this};
+  platform::Work called = std::move(reply);  // is gone before the wait is over
+  called();
 }
 
 }  // namespace tarn::recorder

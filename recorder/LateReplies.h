@@ -10,7 +10,7 @@
 
 #include <chrono>
 #include <cstddef>
-#include <deque>
+#include <list>
 #include <memory>
 #include <string_view>
 #include <utility>
@@ -43,8 +43,14 @@ class LateReplies {
   [[nodiscard]] bool add(platform::Work&& reply, Action taken) {
     const MutexLock lock(line_->mutex);
     if (line_->closed || line_->waiting.size() >= manner_.most) return false;
-    taken();
     enqueue(std::move(reply));
+    // It comes after this, as it takes the lock.
+    try {
+      taken();
+    } catch (...) {
+      line_->waiting.pop_back();
+      throw;
+    }
     return true;
   }
   // Calls `action` unless it is closed; close() waits for that.
@@ -65,11 +71,12 @@ class LateReplies {
 
     Mutex mutex;
     ConditionVariable answered;
-    std::deque<platform::Work> waiting TARN_GUARDED_BY(mutex);
+    std::list<platform::Work> waiting TARN_GUARDED_BY(mutex);
     bool answering TARN_GUARDED_BY(mutex) = false;
     bool closed TARN_GUARDED_BY(mutex) = false;
   };
 
+  // Without the memory for it nothing has changed.
   void enqueue(platform::Work reply) TARN_REQUIRES(line_->mutex);
 
   platform::WorkQueues& workQueues_;

@@ -1,6 +1,7 @@
 #include "recorder/Recorder.h"
 
 #include <algorithm>
+#include <new>
 #include <string>
 #include <utility>
 
@@ -12,16 +13,28 @@ namespace {
 
 using SteadyClock = std::chrono::steady_clock;
 
+constexpr std::chrono::milliseconds kShortagePause{20};
+
 }  // namespace
 
 Recorder::Recorder(RecorderOptions options, platform::Log& log, const platform::Clock& clock)
-    : options_(std::move(options)), log_(log), writer_(options_, log, clock), retry_(options_.firstRetry) {}
+    : options_(std::move(options)),
+      countsFile_(options_.file.string() + ".counts"),
+      log_(log),
+      writer_(options_, log, clock),
+      retry_(options_.firstRetry) {}
 
 Recorder::~Recorder() {
   shutdown();
 }
 
 void Recorder::start() {
+  {
+    // What comes until clients are held up is taken without asking for memory.
+    const MutexLock lock(mutex_);
+    incoming_.reserve(options_.highWaterEvents);
+    current_.reserve(options_.highWaterEvents);
+  }
   openCounts();  // before anything more is handed over
   if (left_) {
     writer_.expect(left_->lastId);
@@ -58,14 +71,21 @@ void Recorder::record(std::string_view backend, std::string_view name, plist::Di
       keepCounts();
       refused = !std::exchange(refusalLogged_, true);
     } else {
-      if (incoming_.empty()) {
+      const std::size_t before = incoming_.bytes();
+      try {
+        waitingBytes_ += incoming_.add(backend, name, std::move(payload), std::move(detail), time);
+      } catch (const std::bad_alloc&) {
+        ++failed_;
+        ++withoutMemory_;
+        keepCounts();
+        throw;
+      }
+      if (incoming_.size() == 1) {
         incomingSince_ = SteadyClock::now();
         if (oldestSince_.load(std::memory_order_relaxed) == 0) {
           oldestSince_.store(incomingSince_.time_since_epoch().count(), std::memory_order_relaxed);
         }
       }
-      const std::size_t before = incoming_.bytes();
-      waitingBytes_ += incoming_.add(backend, name, std::move(payload), std::move(detail), time);
       // While a group is gathered the writer looks by itself; it is called only to begin one, or for a large one.
       wake = std::exchange(asleep_, false) || incoming_.size() == options_.groupEvents ||
              (before < options_.groupBytes && incoming_.bytes() >= options_.groupBytes);
@@ -109,34 +129,59 @@ bool Recorder::isFull() noexcept {
 
 bool Recorder::flush(std::chrono::milliseconds timeout) {
   const MutexLock lock(mutex_);
-  const std::uint64_t target = handedOver_;
+  const std::uint64_t target = accepted();
   awaited_ = target;
   work_.notifyOne();
   // Events are committed in their order, so the count alone tells.
   const bool done =
-      done_.waitFor(mutex_, timeout, [&]() TARN_REQUIRES(mutex_) { return committed_ + failed_ >= target; });
-  return done && failed_ == 0;
+      done_.waitFor(mutex_, timeout, [&]() TARN_REQUIRES(mutex_) { return committed_ >= target || hasGivenUp(); });
+  return done && !hasGivenUp();
 }
 
-void Recorder::settle(std::shared_ptr<platform::WorkQueue> queue, platform::Work done) {
+// One that waits for a commit. Shared with the work that answers it, so that it is still there when no memory was for
+// that work.
+struct Recorder::Settling {
+  std::uint64_t target;  // committed when so many are
+  std::shared_ptr<platform::WorkQueue> queue;
+  platform::Work done;
+};
+
+Recorder::Settlement Recorder::settlement(std::shared_ptr<platform::WorkQueue> queue, platform::Work done) {
+  return {std::make_shared<Settling>(Settling{0, std::move(queue), std::move(done)})};
+}
+
+void Recorder::settle(Settlement settlement) noexcept {
+  const std::shared_ptr<Settling> settling = settlement.front();
   {
     const MutexLock lock(mutex_);
-    if (failed_ > 0) return;  // nothing will be whole again
-    if (committed_ != handedOver_) {
-      awaited_ = handedOver_;
-      settling_.push_back({handedOver_, std::move(queue), std::move(done)});
+    if (hasGivenUp()) return;  // nothing will be whole again
+    settling->target = accepted();
+    if (committed_ != settling->target) {
+      awaited_ = settling->target;
+      settling_.splice(settling_.end(), settlement);
       work_.notifyOne();
       return;
     }
   }
-  queue->async(std::move(done));
+  if (!answer(settling)) {
+    const MutexLock lock(mutex_);
+    settling_.splice(settling_.end(), settlement);  // the writer tries again
+  }
+}
+
+// Whether there was the memory to hand the answer over.
+bool Recorder::answer(const std::shared_ptr<Settling>& settled) noexcept {
+  try {
+    settled->queue->async([settled] { std::exchange(settled->done, {})(); });
+    return true;
+  } catch (const std::bad_alloc&) {
+    return false;
+  }
 }
 
 void Recorder::openCounts() {
   const MutexLock lock(mutex_);
-  std::filesystem::path file = options_.file;
-  file += ".counts";
-  const auto opened = counts_.open(file);
+  const auto opened = counts_.open(countsFile_);
   const bool isFirst = !countsOpen_ && committed_ == 0;
   countsOpen_ = !opened.failed();
   if (!countsOpen_) return;
@@ -158,17 +203,44 @@ void Recorder::tellWhatWasLost() {
   const std::int64_t in = writer_.lastId() - left.lastId - static_cast<std::int64_t>(committed_);
   const std::uint64_t known = left.committed + left.failed + static_cast<std::uint64_t>(std::max<std::int64_t>(in, 0));
   lostBefore_ = left.handedOver > known ? left.handedOver - known : 0;
-  if (lostBefore_ > 0) {
-    log_.error("recorder lost " + std::to_string(lostBefore_) +
-               " events that were handed over to the run before and not committed when it ended");
-  }
   before_ = {};
   lastId_ = writer_.lastId();
   keepCounts();
+  if (lostBefore_ > 0) {
+    tell([&] {
+      return "recorder lost " + std::to_string(lostBefore_) +
+             " events that were handed over to the run before and not committed when it ended";
+    });
+  }
+}
+
+// A line that is worth no failure: where there is no memory for it, `status` still tells the count.
+template <class Text>
+void Recorder::tell(Text text) noexcept {
+  try {
+    log_.error(text());
+  } catch (const std::bad_alloc&) {
+    log_.error("recorder has no memory to say what it lost");
+  }
+}
+
+// One step of the writer's. Where memory is missing in it, it is as with a disk that fails: nothing is lost, and it is
+// tried again later.
+template <class Step>
+bool Recorder::tryTo(Step step) noexcept {
+  try {
+    const bool healthy = step();
+    shortage_ = !healthy && writer_.lacksMemory();
+    return healthy;
+  } catch (const std::bad_alloc&) {
+    writer_.closeAfterFault();  // what was in a transaction isn't in, which the next opening finds
+    shortage_ = true;
+    return false;
+  }
 }
 
 void Recorder::run() {
-  bool healthy = writer_.open() && writer_.settle();
+  bool healthy = tryTo([this] { return writer_.open() && writer_.settle(); });
   if (healthy && left_) {
     tellWhatWasLost();
   }
@@ -199,6 +271,7 @@ void Recorder::run() {
       if (healthy && SteadyClock::now() >= nextVerification_) {
         healthy = verify();
       }
+      healthy = healthy && answerSettled();
       if (stopping_ && !healthy) {
         --triesLeft;
       }
@@ -234,7 +307,8 @@ void Recorder::gather() {
 }
 
 void Recorder::waitForRetry() {
-  const auto pause = std::exchange(retry_, std::min(retry_ * 2, options_.lastRetry));
+  // Memory comes back sooner than a disk, and clients are held up meanwhile.
+  const auto pause = shortage_ ? kShortagePause : std::exchange(retry_, std::min(retry_ * 2, options_.lastRetry));
   // Being called to stop ends a long pause; the last tries then come at their own pace.
   const bool stoppedBefore = stopping_;
   if (stoppedBefore) {
@@ -248,7 +322,11 @@ void Recorder::waitForRetry() {
 
 bool Recorder::writeCurrent() {
   mutex_.unlock();
-  const std::size_t events = writer_.write(current_, position_);
+  std::size_t events = 0;
+  tryTo([&] {
+    events = writer_.write(current_, position_);
+    return events > 0;
+  });
   std::size_t bytes = 0;
   for (std::size_t i = 0; i < events; ++i) {
     bytes += current_[position_ + i].bytes;
@@ -262,7 +340,7 @@ bool Recorder::writeCurrent() {
     current_.clear();
     position_ = 0;
   }
-  const bool healthy = events > 0 && writer_.settle();
+  const bool healthy = events > 0 && tryTo([this] { return writer_.settle(); });
   if (writer_.hasMoreToBringIn()) {
     nextMaintenance_ = std::min(nextMaintenance_, SteadyClock::now() + options_.lastRetry);
   }
@@ -273,7 +351,7 @@ bool Recorder::writeCurrent() {
 // A piece at a time, then a long rest: what it costs stays below a hundredth of the time.
 bool Recorder::verify() {
   mutex_.unlock();
-  const bool healthy = writer_.verify();
+  const bool healthy = tryTo([this] { return writer_.verify(); });
   const auto pause = writer_.isVerified() ? options_.verifyRest : options_.verifyInterval;
   nextVerification_ = SteadyClock::now() + pause;
   mutex_.lock();
@@ -300,7 +378,7 @@ bool Recorder::hasRoom() const {
 
 bool Recorder::maintain() {
   mutex_.unlock();
-  const bool healthy = writer_.maintain() && writer_.settle();
+  const bool healthy = tryTo([this] { return writer_.maintain() && writer_.settle(); });
   auto pause = writer_.hasMoreToBringIn() ? options_.lastRetry : options_.maintenanceInterval;
   if (writer_.hasMoreToExpire()) {
     pause = std::chrono::milliseconds(0);
@@ -321,13 +399,16 @@ void Recorder::account(std::size_t events, std::size_t bytes) {
     noteOldest();
     if (!countsOpen_ || counts_.isTorn()) {
       mutex_.unlock();
-      openCounts();
+      try {
+        openCounts();
+      } catch (const std::bad_alloc&) {  // the next commit tries again
+      }
       mutex_.lock();
     }
     keepCounts();
   }
   done_.notifyAll();
-  answerSettled();
+  static_cast<void>(answerSettled());
   if ((full_.load(std::memory_order_relaxed) || isCrowded()) && hasRoom()) {
     full_.store(false, std::memory_order_relaxed);
     crowded_.store(false, std::memory_order_relaxed);
@@ -339,19 +420,22 @@ void Recorder::account(std::size_t events, std::size_t bytes) {
   }
 }
 
-// Called locked, and returns so; queues are called without the lock.
-void Recorder::answerSettled() {
-  while (!settling_.empty() && settling_.front().handedOver <= committed_) {
-    Settling settled = std::move(settling_.front());
-    settling_.pop_front();
+// Called locked, and returns so; queues are called without the lock. False when memory is missing for an answer: it is
+// still owed.
+bool Recorder::answerSettled() {
+  while (!settling_.empty() && settling_.front()->target <= committed_) {
+    const std::shared_ptr<Settling> settled = settling_.front();
     mutex_.unlock();
-    settled.queue->async(std::move(settled.done));
+    const bool answered = answer(settled);
     mutex_.lock();
+    if (!answered) return false;
+    settling_.pop_front();
   }
+  return true;
 }
 
 void Recorder::giveUp() {
-  std::deque<Settling> unanswered;
+  Settlement unanswered;
   unanswered.swap(settling_);
   const std::uint64_t lost = handedOver_ - committed_ - failed_;
   failed_ += lost;
@@ -365,8 +449,10 @@ void Recorder::giveUp() {
   mutex_.unlock();
   unanswered.clear();  // each may hold the last of something
   if (lost > 0) {
-    log_.error("recorder gives up " + std::to_string(lost) + " events that could not be written to " +
-               options_.file.string() + ": " + writer_.problem());
+    tell([&] {
+      return "recorder gives up " + std::to_string(lost) + " events that could not be written to " +
+             options_.file.string() + ": " + writer_.problem();
+    });
   }
   mutex_.lock();
 }

@@ -14,7 +14,8 @@
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
-#include <deque>
+#include <filesystem>
+#include <list>
 #include <memory>
 #include <optional>
 #include <string_view>
@@ -40,7 +41,7 @@ struct RecorderCounters {
   std::uint64_t committed = 0;
   std::uint64_t waiting = 0;
   std::uint64_t expired = 0;  // removed by retention
-  std::uint64_t failed = 0;   // given up at a shutdown, by a disk that never came back
+  std::uint64_t failed = 0;   // given up at a shutdown, by a disk that never came back, or no memory to take it
   // Of the run before: handed over and never committed, because it was killed or the machine stopped.
   std::uint64_t lostBefore = 0;
 };
@@ -66,7 +67,8 @@ class Recorder {
   void shutdown();
 
   // Hands an event over, before start() too; `backend` must be a text that lives for ever, `time` is in epoch seconds.
-  // After shutdown() the event counts as failed. Threads: any.
+  // After shutdown() the event counts as failed; and so does one that there is no memory for, which throws. Threads:
+  // any.
   void record(std::string_view backend, std::string_view name, plist::Dictionary payload, plist::Dictionary detail,
               double time);
   // Whether events should not be brought in for now: too many wait, or the oldest for too long. Threads: any.
@@ -81,19 +83,23 @@ class Recorder {
   // The same without waiting here: once all that was handed over before the call is committed, `done` becomes work of
   // the queue (at once when it is committed already), in the order of the calls. Destroyed uncalled when some of it is
   // given up at a shutdown. Threads: any.
-  void settle(std::shared_ptr<platform::WorkQueue> queue, platform::Work done);
+  void settle(std::shared_ptr<platform::WorkQueue> queue, platform::Work done) {
+    settle(settlement(std::move(queue), std::move(done)));
+  }
+  // In two steps, of which the second needs no memory.
+  struct Settling;
+  using Settlement = std::list<std::shared_ptr<Settling>>;
+  static Settlement settlement(std::shared_ptr<platform::WorkQueue> queue, platform::Work done);
+  void settle(Settlement settlement) noexcept;
 
  private:
   using TimePoint = std::chrono::steady_clock::time_point;
 
-  // One that waits for a commit.
-  struct Settling {
-    std::uint64_t handedOver;  // committed when so many are
-    std::shared_ptr<platform::WorkQueue> queue;
-    platform::Work done;
-  };
-
   void run();
+  template <class Step>
+  bool tryTo(Step step) noexcept;
+  template <class Text>
+  void tell(Text text) noexcept;
   void keepCounts() TARN_REQUIRES(mutex_);
   void openCounts();
   void tellWhatWasLost();
@@ -107,12 +113,17 @@ class Recorder {
   void noteOldest() TARN_REQUIRES(mutex_);
   bool hasRoom() const TARN_REQUIRES(mutex_);
   void account(std::size_t events, std::size_t bytes) TARN_REQUIRES(mutex_);
-  void answerSettled() TARN_REQUIRES(mutex_);
+  bool answerSettled() TARN_REQUIRES(mutex_);
+  static bool answer(const std::shared_ptr<Settling>& settled) noexcept;
   void giveUp() TARN_REQUIRES(mutex_);
+  // Of what was handed over, that which is to be committed.
+  std::uint64_t accepted() const noexcept TARN_REQUIRES(mutex_) { return handedOver_ - failed_; }
+  bool hasGivenUp() const noexcept TARN_REQUIRES(mutex_) { return failed_ != withoutMemory_; }
   bool hasWaiting() const noexcept TARN_REQUIRES(mutex_) { return committed_ + failed_ != handedOver_; }
   bool isAwaited() const noexcept TARN_REQUIRES(mutex_) { return committed_ < awaited_; }
 
   const RecorderOptions options_;
+  const std::filesystem::path countsFile_;
   RecorderLog log_;
   RoomHandler roomHandler_;
   std::thread thread_;
@@ -122,6 +133,7 @@ class Recorder {
   EventBatch current_;
   std::size_t position_ = 0;  // in current_: what stands before it is committed
   std::chrono::milliseconds retry_;
+  bool shortage_ = false;  // the last step failed for want of memory
   TimePoint nextMaintenance_;
   TimePoint nextVerification_;
   TimePoint currentSince_;              // of the first event in current_
@@ -140,6 +152,7 @@ class Recorder {
   std::uint64_t handedOver_ TARN_GUARDED_BY(mutex_) = 0;
   std::uint64_t committed_ TARN_GUARDED_BY(mutex_) = 0;
   std::uint64_t failed_ TARN_GUARDED_BY(mutex_) = 0;
+  std::uint64_t withoutMemory_ TARN_GUARDED_BY(mutex_) = 0;  // of these
   std::uint64_t expired_ TARN_GUARDED_BY(mutex_) = 0;
   std::uint64_t lostBefore_ TARN_GUARDED_BY(mutex_) = 0;
   HandOverPage counts_ TARN_GUARDED_BY(mutex_);
@@ -147,8 +160,8 @@ class Recorder {
   std::int64_t lastId_ TARN_GUARDED_BY(mutex_) = 0;  // of the last committed event
   bool countsOpen_ TARN_GUARDED_BY(mutex_) = false;
   bool busy_ TARN_GUARDED_BY(mutex_) = false;          // the last group was large
-  std::uint64_t awaited_ TARN_GUARDED_BY(mutex_) = 0;  // handed over before the last flush() or settle()
-  std::deque<Settling> settling_ TARN_GUARDED_BY(mutex_);
+  std::uint64_t awaited_ TARN_GUARDED_BY(mutex_) = 0;  // accepted before the last flush() or settle()
+  Settlement settling_ TARN_GUARDED_BY(mutex_);
   bool asleep_ TARN_GUARDED_BY(mutex_) = false;  // the writer waits for the first event of a group
   bool opened_ TARN_GUARDED_BY(mutex_) = false;
   bool stopping_ TARN_GUARDED_BY(mutex_) = false;

@@ -1,5 +1,6 @@
 #include "recorder/RecorderLog.h"
 
+#include <new>
 #include <string>
 
 #include "platform/LogPrefix.h"
@@ -23,10 +24,14 @@ void RecorderLog::notice(std::string_view text, int line) noexcept {
 
 void RecorderLog::write(platform::LogLevel level, std::string_view text, int line) noexcept {
   if (level < log_.threshold()) return;
-  std::string whole;
-  platform::appendLogPrefix(whole, kModule, line);
-  whole.append(text);
-  log_.write(platform::LogEntry{kCategory, level, kModule, line, whole});
+  try {
+    std::string whole;
+    platform::appendLogPrefix(whole, kModule, line);
+    whole.append(text);
+    log_.write(platform::LogEntry{kCategory, level, kModule, line, whole});
+  } catch (const std::bad_alloc&) {
+    log_.write(platform::LogEntry{kCategory, level, kModule, line, platform::kNoMemoryForLine});
+  }
 }
 
 }  // namespace tarn::recorder

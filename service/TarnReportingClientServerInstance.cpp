@@ -1,6 +1,7 @@
 #include "service/TarnReportingClientServerInstance.h"
 
 #include <algorithm>
+#include <new>
 
 #include "platform/Facilities.h"
 #include "platform/ProcessControl.h"
@@ -125,15 +126,15 @@ void TarnReportingClientServerInstance::startReportingSessionForID(std::int64_t 
 void TarnReportingClientServerInstance::sendMessage(plist::Dictionary message, std::uint32_t category,
                                                     std::uint16_t type, platform::ReporterIDs reporterIDs,
                                                     platform::Reply<> reply) {
-  if ((!reporterIDs || reporterIDs->empty()) && TarnReportingUtilityIsInternalBuild()) {
+  TarnReportingMessageDelivery sent(std::move(message), category, type, std::move(reporterIDs), std::move(reply),
+                                    TarnReportingMessageAccount(delegate_));
+  if (sent.isForWhoeverRuns() && TarnReportingUtilityIsInternalBuild()) {
     // Workers of internal builds tell by this key that the message came without a session.
     if (const auto service = delegate_.lock(); service && service->isReportingEnabled()) {
-      message.set("sendSingleMessage", true);
+      sent.add("sendSingleMessage", true);
     }
   }
-  onServerQueue([self = shared_from_this(),
-                 delivery = TarnReportingMessageDelivery(std::move(message), category, type, std::move(reporterIDs),
-                                                         std::move(reply))]() mutable {
+  onServerQueue([self = shared_from_this(), delivery = std::move(sent)]() mutable {
     const auto signpost = operation("sendMessage", {"category", delivery.category()});
     delivery.begin(self->processIdentifier_, self->delegate_);
   });
@@ -313,7 +314,12 @@ void TarnReportingClientServerInstance::endClient() {
   }
   const auto rest = [self = shared_from_this()] { self->endClient(); };
   while (const auto session = sessions_.firstRunning()) {
-    stopSession(*session);
+    try {
+      stopSession(*session);
+    } catch (const std::bad_alloc&) {
+      kLog(LogLevel::Error, "no memory to stop session %lli, it is dropped", session->reporterID());
+      sessions_.remove(session->reporterID());
+    }
     if (sessions_.size() > 1 && TarnReportingSpend(kStopCost)) {
       TarnReportingContinueLater(rest);
       return;

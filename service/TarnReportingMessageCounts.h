@@ -15,7 +15,7 @@ enum class TarnReportingOutcome : std::uint8_t {
   Unwanted,        // no worker of its sessions was there to get it
   Undeliverable,   // its sessions ended before their turn came
   WithoutSession,  // nobody has a session under its IDs
-  Refused,         // reporting is disabled
+  Refused,         // reporting is disabled, or memory was missing in the middle of it
 };
 
 struct TarnReportingMessageCounts {

@@ -47,9 +47,7 @@ void TarnReportingMessageDelivery::begin(std::int32_t processIdentifier,
   kLog(LogLevel::Debug, "sending message for reporter %@", [&] { return textOf(search_.reporterIDs, storage); });
   TarnReportingFacilities().tracePoints.emit(kTraceSend, processIdentifier);
   if (const auto delegate = service.lock(); !delegate || !delegate->isReportingEnabled()) {
-    if (delegate) {
-      delegate->countMessage(TarnReportingOutcome::Refused);
-    }
+    account_.close(TarnReportingOutcome::Refused);
     reply_(platform::RemoteError{kErrorDomain, kReportingDisabled, "reporting is disabled"});
     return;
   }
@@ -74,7 +72,7 @@ void TarnReportingMessageDelivery::proceed(const std::weak_ptr<TarnReportingServ
       return;
     }
   }
-  service->countMessage(outcome_);
+  account_.close(outcome_);
   reply_(std::nullopt);
 }
 

@@ -8,6 +8,7 @@
 #include <memory>
 
 #include "plist/Dictionary.h"
+#include "service/TarnReportingMessageAccount.h"
 #include "service/TarnReportingServiceDelegateProtocol.h"
 
 namespace tarn {
@@ -15,16 +16,20 @@ namespace tarn {
 class TarnReportingMessageDelivery {
  public:
   TarnReportingMessageDelivery(plist::Dictionary message, std::uint32_t category, std::uint16_t type,
-                               platform::ReporterIDs reporterIDs, platform::Reply<> reply)
+                               platform::ReporterIDs reporterIDs, platform::Reply<> reply,
+                               TarnReportingMessageAccount account)
       : message_(std::move(message)),
         category_(category),
         type_(type),
         reply_(std::move(reply)),
+        account_(std::move(account)),
         search_{std::move(reporterIDs), {}} {}
   TarnReportingMessageDelivery(TarnReportingMessageDelivery&&) = default;
-  TarnReportingMessageDelivery& operator=(TarnReportingMessageDelivery&&) = default;
 
   std::uint32_t category() const noexcept { return category_; }
+  // Before begin(): one more entry of the message.
+  void add(std::string_view key, const plist::ValueView& value) { message_.set(plist::Key(key), value); }
+  bool isForWhoeverRuns() const { return !search_.reporterIDs || search_.reporterIDs->empty(); }
   // Delivers it, and replies at the end: with an error where the service is gone or reporting is disabled.
   void begin(std::int32_t processIdentifier, const std::weak_ptr<TarnReportingServiceDelegateProtocol>& service);
 
@@ -32,12 +37,12 @@ class TarnReportingMessageDelivery {
   void proceed(const std::weak_ptr<TarnReportingServiceDelegateProtocol>& delegate);
   void giveWay(const std::weak_ptr<TarnReportingServiceDelegateProtocol>& delegate);
   void handOver(const std::shared_ptr<TarnReportingSession>& session, bool isLast);
-  bool isForWhoeverRuns() const { return !search_.reporterIDs || search_.reporterIDs->empty(); }
 
   plist::Dictionary message_;
   std::uint32_t category_;
   std::uint16_t type_;
   platform::Reply<> reply_;
+  TarnReportingMessageAccount account_;
   TarnReportingServiceDelegateProtocol::SessionSearch search_;
   bool found_ = false;    // the search is over
   bool gaveWay_ = false;  // others' work was done since then

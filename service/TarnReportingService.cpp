@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <new>
 
 #include "derived/TarnReportingSystemMonitor.h"
 #include "platform/Clock.h"
@@ -116,10 +117,12 @@ bool TarnReportingService::listenerShouldAcceptNewConnection(const std::shared_p
   }
   TarnReportingUtilityGetReportingServerQueue()->async([self = shared_from_this(), client, processIdentifier] {
     client->setClientStartDate(TarnReportingFacilities().clock.epochSeconds());
+    {
+      const MutexLock lock(self->mutex_);
+      self->clients_.push_back(client);
+      client->listSessions(self->index_, self->nextClientNumber_++);
+    }
     client->setClientProcessName(TarnReportingFacilities().processFacts.processName(processIdentifier).value_or(""));
-    const MutexLock lock(self->mutex_);
-    client->listSessions(self->index_, self->nextClientNumber_++);
-    self->clients_.push_back(client);
   });
   const std::weak_ptr<TarnReportingClientServerInstance> weakClient = client;
   connection->setInterruptionHandler([weakClient] {
@@ -262,9 +265,8 @@ void TarnReportingService::announceEnd() {
 }
 
 void TarnReportingService::endSingleMessageSession() {
-  if (singleMessageSession_) {
-    singleMessageSession_->stop();
-    singleMessageSession_.reset();
+  if (const auto session = std::exchange(singleMessageSession_, nullptr)) {
+    session->stop();
   }
 }
 
@@ -290,16 +292,17 @@ std::shared_ptr<TarnReportingSession> TarnReportingService::retrieveSingleMessag
   singleMessageSessionLastRetrieved_ = TarnReportingFacilities().clock.monotonic();
   if (!singleMessageSession_) {
     kLog(LogLevel::Default, "Creating singleMessageSession");
-    singleMessageSession_ = TarnReportingSession::initWithID(
+    const auto session = TarnReportingSession::initWithID(
         kSingleMessageReporterID, {TarnReportingFacilities().processFacts.ownProcessIdentifier()},
         TarnReportingSession::Mode::SingleMessage);
-    singleMessageSession_->setServiceType(AudioServiceType::Standalone);
+    session->setServiceType(AudioServiceType::Standalone);
     const plist::Dictionary configuration{{"HostApplicationDisplayID", "Unknown"}};
-    singleMessageSession_->updateConfigurationWithContentsOfConfiguration(&configuration);
-    singleMessageSession_->start();
+    session->updateConfigurationWithContentsOfConfiguration(&configuration);
+    session->start();
     // The extra microsecond lets a session that was used just once exceed the timeout at the first check.
     queueStopSingleSession(std::chrono::duration_cast<std::chrono::nanoseconds>(kTimeout) +
                            std::chrono::microseconds(1));
+    singleMessageSession_ = session;  // as a whole, or the next message makes another
   }
   return singleMessageSession_;
 }
@@ -320,13 +323,16 @@ void TarnReportingService::checkSingleSession() {
       TarnReportingFacilities().clock.monotonic() - singleMessageSessionLastRetrieved_;
   if (idle > kTimeout) {
     kLog(LogLevel::Default, "Stopping singleMessageSession timeout=%f", kTimeout.count());
-    singleMessageSession_->stop();
-    singleMessageSession_.reset();
+    endSingleMessageSession();
     return;
   }
   kLog(LogLevel::Debug, "Not stopping singleMessageSession timeSinceLastUsed=%f timeout=%f", idle.count(),
        kTimeout.count());
-  queueStopSingleSession(std::chrono::duration_cast<std::chrono::nanoseconds>(kTimeout));
+  try {
+    queueStopSingleSession(std::chrono::duration_cast<std::chrono::nanoseconds>(kTimeout));
+  } catch (const std::bad_alloc&) {
+    endSingleMessageSession();  // nobody would look at it again
+  }
 }
 
 }  // namespace tarn

@@ -5,22 +5,33 @@
 namespace tarn {
 
 void TarnReportingSessionIndex::add(std::int64_t reporterID, std::uint64_t number, Client& client) {
+  std::size_t& sessions = sessionsOf_[number];
   auto& holders = holders_[reporterID];
-  const auto place = std::find_if(holders.rbegin(), holders.rend(), [&](const Holder& h) { return h.number < number; });
-  holders.insert(place.base(), Holder{number, &client});
-  ++sessionCount_;
-  if (++sessionsOf_[number] == 1) {
+  try {
+    const auto place =
+        std::find_if(holders.rbegin(), holders.rend(), [&](const Holder& h) { return h.number < number; });
+    holders.insert(place.base(), Holder{number, &client});
     clients_.emplace(number, &client);
+  } catch (...) {
+    removeHolder(reporterID, number);
+    throw;
   }
+  ++sessions;
+  ++sessionCount_;
 }
 
-void TarnReportingSessionIndex::remove(std::int64_t reporterID, std::uint64_t number) {
+bool TarnReportingSessionIndex::removeHolder(std::int64_t reporterID, std::uint64_t number) noexcept {
   const auto entry = holders_.find(reporterID);
-  if (entry == holders_.end()) return;
-  if (std::erase_if(entry->second, [&](const Holder& holder) { return holder.number == number; }) == 0) return;
+  if (entry == holders_.end()) return false;
+  const bool removed = std::erase_if(entry->second, [&](const Holder& h) { return h.number == number; }) != 0;
   if (entry->second.empty()) {
     holders_.erase(entry);
   }
+  return removed;
+}
+
+void TarnReportingSessionIndex::remove(std::int64_t reporterID, std::uint64_t number) {
+  if (!removeHolder(reporterID, number)) return;
   --sessionCount_;
   if (const auto count = sessionsOf_.find(number); count != sessionsOf_.end() && --count->second == 0) {
     sessionsOf_.erase(count);

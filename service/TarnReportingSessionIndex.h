@@ -27,7 +27,7 @@ class TarnReportingSessionIndex {
   TarnReportingSessionIndex(const TarnReportingSessionIndex&) = delete;
   TarnReportingSessionIndex& operator=(const TarnReportingSessionIndex&) = delete;
 
-  // The client has one more session, or one less, under this ID.
+  // The client has one more session, or one less, under this ID. Without the memory for one more nothing has changed.
   void add(std::int64_t reporterID, std::uint64_t number, Client& client);
   void remove(std::int64_t reporterID, std::uint64_t number);
   // So many more sessions run; fewer, when it is negative.
@@ -45,6 +45,8 @@ class TarnReportingSessionIndex {
     std::uint64_t number;
     Client* client;
   };
+
+  bool removeHolder(std::int64_t reporterID, std::uint64_t number) noexcept;
 
   // In the order of the clients. Mostly one; but a thousand clients may all number their sessions from 1.
   std::unordered_map<std::int64_t, std::vector<Holder>> holders_;

@@ -28,15 +28,25 @@ void TarnReportingSessionMap::list(std::shared_ptr<TarnReportingSessionIndex> in
 }
 
 void TarnReportingSessionMap::store(std::int64_t reporterID, Session session) {
-  const auto [place, isNew] = places_.try_emplace(reporterID, nextPlace_);
-  if (isNew) {
-    ++nextPlace_;
+  if (const auto place = places_.find(reporterID); place != places_.end()) {
+    setRunning(reporterID, false);
+    ordered_.at(place->second).session = std::move(session);
+    return;
+  }
+  const auto entry = ordered_.emplace(nextPlace_, Entry{reporterID, std::move(session), {}}).first;
+  try {
+    Running spare{{nextPlace_, &entry->second}};
+    entry->second.whileNotRunning = spare.extract(spare.begin());
+    places_.emplace(reporterID, nextPlace_);
     if (index_ != nullptr) {
       index_->add(reporterID, number_, *client_);
     }
+  } catch (...) {
+    places_.erase(reporterID);
+    ordered_.erase(entry);
+    throw;
   }
-  noteRunning(-static_cast<std::ptrdiff_t>(running_.erase(place->second)));
-  ordered_.insert_or_assign(place->second, Entry{reporterID, std::move(session)});
+  ++nextPlace_;
 }
 
 void TarnReportingSessionMap::remove(std::int64_t reporterID) {
@@ -50,14 +60,17 @@ void TarnReportingSessionMap::remove(std::int64_t reporterID) {
   places_.erase(place);
 }
 
-void TarnReportingSessionMap::setRunning(std::int64_t reporterID, bool running) {
+void TarnReportingSessionMap::setRunning(std::int64_t reporterID, bool running) noexcept {
   const auto place = places_.find(reporterID);
   if (place == places_.end()) return;
-  if (!running) {
-    noteRunning(-static_cast<std::ptrdiff_t>(running_.erase(place->second)));
-  } else if (running_.emplace(place->second, &ordered_.at(place->second)).second) {
-    noteRunning(1);
+  Entry& entry = ordered_.find(place->second)->second;
+  if (running == entry.whileNotRunning.empty()) return;
+  if (running) {
+    running_.insert(std::move(entry.whileNotRunning));
+  } else {
+    entry.whileNotRunning = running_.extract(place->second);
   }
+  noteRunning(running ? 1 : -1);
 }
 
 void TarnReportingSessionMap::noteRunning(std::ptrdiff_t more) noexcept {

@@ -42,11 +42,11 @@ class TarnReportingSessionMap {
   // The session under this ID, or nothing.
   Session find(std::int64_t reporterID) const;
   // Stores the session under this ID, as one that doesn't run; one that is there already is dropped and gives it its
-  // place.
+  // place. Without the memory for it nothing has changed.
   void store(std::int64_t reporterID, Session session);
   void remove(std::int64_t reporterID);
-  // Notes that the session under this ID was started or stopped.
-  void setRunning(std::int64_t reporterID, bool running);
+  // Notes that the session under this ID was started or stopped. Needs no memory.
+  void setRunning(std::int64_t reporterID, bool running) noexcept;
   std::size_t size() const noexcept { return ordered_.size(); }
   std::size_t runningCount() const noexcept { return running_.size(); }
   // The first of those that run, and of all; nothing when there is none.
@@ -80,15 +80,18 @@ class TarnReportingSessionMap {
   }
 
  private:
+  struct Entry;
+  using Running = std::map<Place, const Entry*>;
   struct Entry {
     std::int64_t reporterID;
     Session session;
+    Running::node_type whileNotRunning;  // its node of running_
   };
 
   void noteRunning(std::ptrdiff_t more) noexcept;
 
   std::map<Place, Entry> ordered_;
-  std::map<Place, const Entry*> running_;
+  Running running_;
   std::unordered_map<std::int64_t, Place> places_;
   Place nextPlace_ = 0;
 

@@ -3,9 +3,12 @@
 // A signal ends the clients in order, with their sessions. The process then ends without tearing the parts down: what
 // the back-ends hold is committed, then it exits at once.
 #include <cstdint>
+#include <cstdio>
 #include <cstdlib>
+#include <exception>
 #include <iostream>
 #include <memory>
+#include <new>
 #include <string>
 #include <utility>
 
@@ -35,6 +38,12 @@ int refuse(const std::string& complaint, std::int64_t exitStatus = kExitFailure)
   return static_cast<int>(exitStatus);
 }
 
+// Of memory or threads.
+int refuseForWantOf(const std::exception& shortage) {
+  const bool isMemory = dynamic_cast<const std::bad_alloc*>(&shortage) != nullptr;
+  return refuse(isMemory ? "out of memory" : shortage.what());
+}
+
 std::shared_ptr<TarnReportingService> makeService(platform::Log& log) {
   TarnReportingSession::setAllWorkerClasses(TarnReportingWorkerClasses());
   std::shared_ptr<TarnReportingService> service = TarnReportingService::create();
@@ -58,6 +67,28 @@ ServiceCounts countsOf(const TarnReportingService& service) {
   return counts;
 }
 
+// Until somebody can connect, memory that is missing where nobody can catch that, as for the keys that are made before
+// main(), ends the process in one line.
+struct StartWithoutMemory {
+  [[noreturn]] static void end() noexcept;
+  std::terminate_handler usual = std::set_terminate(&end);
+};
+const StartWithoutMemory startWithoutMemory __attribute__((init_priority(101)));
+
+void StartWithoutMemory::end() noexcept {
+  try {
+    if (const std::exception_ptr reason = std::current_exception()) {
+      std::rethrow_exception(reason);
+    }
+  } catch (const std::bad_alloc&) {
+    static_cast<void>(std::fputs("tarnreportingd: out of memory\n", stderr));
+    std::_Exit(kExitFailure);
+  } catch (...) {  // what the usual end tells
+  }
+  startWithoutMemory.usual();
+  std::abort();
+}
+
 // Serves until a signal; the exit status.
 int serve(LinuxPlatform& platform, HostSetup& setup) {
   MainLoop& loop = platform.loop();
@@ -74,15 +105,13 @@ int serve(LinuxPlatform& platform, HostSetup& setup) {
   // Only now is there anything to connect to: who can reach the service finds it whole, its notifications heard.
   const Status listening = platform.listen(std::move(setup.socket), service, [&service] { return countsOf(*service); });
   if (listening.failed()) return refuse(listening->text);
+  std::set_terminate(startWithoutMemory.usual);
   platform.serve();
   return kExitSuccess;
 }
 
-}  // namespace
-}  // namespace tarn
-
-int main(int argumentCount, char** arguments) {
-  using namespace tarn;
+// The exit status.
+int run(int argumentCount, char** arguments) {
   const ServiceCommand command = parseServiceCommand(argumentCount, arguments, HostEnvironment::current());
   std::cout << command.output << std::flush;
   if (command.usage.failed()) return refuse(command.usage->text, command.usage->code);
@@ -94,7 +123,23 @@ int main(int argumentCount, char** arguments) {
   ServiceManager serviceManager;
   LinuxPlatform platform(setup.configuration, command.options->stateDirectory, setup.deviceProperties,
                          {setup.clock, *setup.log, serviceManager, [&setup] { setup.settleLog(); }});
-  const int status = serve(platform, setup);
+  int status = kExitFailure;
+  try {
+    status = serve(platform, setup);
+  } catch (const std::exception& shortage) {  // before anybody can connect
+    refuseForWantOf(shortage);
+  }
   setup.settleLog();
   std::_Exit(status);  // other threads still use the platform's parts
+}
+
+}  // namespace
+}  // namespace tarn
+
+int main(int argumentCount, char** arguments) {
+  try {
+    return tarn::run(argumentCount, arguments);
+  } catch (const std::exception& shortage) {
+    return tarn::refuseForWantOf(shortage);
+  }
 }

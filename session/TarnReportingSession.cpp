@@ -102,9 +102,16 @@ void TarnReportingSession::start() {
     return;
   }
   kLog(LogLevel::Debug, "self.started==false. starting. reporterID=%lli", reporterID_);
+  // A start that fails in the middle goes on where it stopped when it is tried again.
+  struct Starting {
+    bool& started;
+    bool failed = true;
+    ~Starting() { started = !failed; }
+  } starting{started_};
   started_ = true;
   trace(kTraceStarted, reporterID_);
   workers_.startWorkersFromClasses(workerClasses().initializableWorkerClasses, shared_from_this());
+  starting.failed = false;
 }
 
 void TarnReportingSession::stop() {

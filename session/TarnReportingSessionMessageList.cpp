@@ -71,6 +71,10 @@ void TarnReportingSessionMessageList::append(Record record) {
     memory_ = ProcessState::of<TarnReportingSessionLogMemory>();
   }
   const std::size_t cost = memory_->costOf(*record);
+  // Whatever needs memory first: the record is in the list, and counted, or it isn't.
+  if (chunks_.size() == chunks_.capacity()) {
+    chunks_.reserve(2 * chunks_.size() + 1);
+  }
   recent_.push_back(std::move(record));
   memory_->add(*this, cost);
   ++openChunk_.records;
@@ -83,7 +87,10 @@ void TarnReportingSessionMessageList::append(Record record) {
 }
 
 void TarnReportingSessionMessageList::clear() {
-  recent_ = TarnReportingSessionMessages();  // gives the memory back too
+  // Not by a new one in its place: a deque allocates when it is made, and an end must not fail. What the records took
+  // goes back when there is the memory for a small one.
+  recent_.clear();
+  recent_.shrink_to_fit();
   chunks_ = {};
   firstChunk_ = 0;
   openChunk_ = {};

@@ -13,11 +13,19 @@ std::uint64_t keyOf(AudioEventCategory category, AudioEventType type) {
 }  // namespace
 
 void TarnReportingSessionMessageLog::append(Record record) {
-  Newest& newest = newest_[keyOf(record->category(), record->type())];
+  // The place first: what points to the record must not outlive one that found no room.
+  const auto [place, isNew] = newest_.try_emplace(keyOf(record->category(), record->type()));
   const std::size_t index = messages_.size();
   const TarnReportingSessionMessage* const recent = record.get();
-  messages_.append(std::move(record));
-  note(newest, index, recent);
+  try {
+    messages_.append(std::move(record));
+  } catch (...) {
+    if (isNew) {
+      newest_.erase(place);
+    }
+    throw;
+  }
+  note(place->second, index, recent);
 }
 
 void TarnReportingSessionMessageLog::note(Newest& newest, std::size_t index,

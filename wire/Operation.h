@@ -167,8 +167,11 @@ enum class ErrorCode : std::uint8_t {
   BadArguments = 2,     // wrong count, or a wrong kind or range in an argument's place
   NotPropertyList = 3,  // something inside a dictionary argument that a property list can't hold
   OverQuota = 4,        // the client or its user has as much as it may have
+  OutOfMemory = 5,      // the service has no memory for it now
 };
-inline constexpr std::size_t kErrorCodes = 4;
+inline constexpr std::size_t kErrorCodes = 5;
+// The text of that error: short enough for a string to hold it in itself.
+inline constexpr std::string_view kOutOfMemory = "out of memory";
 
 // Containers inside each other, a dictionary argument being the first.
 inline constexpr std::size_t kMaxNesting = 64;

@@ -1,6 +1,7 @@
 #include "wire/RequestDecoder.h"
 
 #include <limits>
+#include <new>
 #include <utility>
 
 #include "wire/BuilderSink.h"
@@ -184,14 +185,8 @@ std::string RequestPass::describe() const {
   return text += trouble;
 }
 
-}  // namespace
-
-DecodeVerdict RequestDecoder::decode(std::span<const std::byte> frame, DecodedRequest& request, Refusal& refusal) {
-  request = DecodedRequest{};
-  RequestPass pass(frame, request, builder_, keyLists_);
-  if (pass.run()) [[likely]] {
-    return DecodeVerdict::Ok;
-  }
+// What is wrong with a frame that the pass stopped in.
+DecodeVerdict judge(std::span<const std::byte> frame, const RequestPass& pass, Refusal& refusal) {
   if (const char* why = checkOneItem(frame)) {
     refusal.text = why;
     return DecodeVerdict::Unreadable;
@@ -203,6 +198,25 @@ DecodeVerdict RequestDecoder::decode(std::span<const std::byte> frame, DecodedRe
   refusal.code = pass.code();
   refusal.text = pass.describe();
   return DecodeVerdict::Refused;
+}
+
+}  // namespace
+
+DecodeVerdict RequestDecoder::decode(std::span<const std::byte> frame, DecodedRequest& request, Refusal& refusal) {
+  request = DecodedRequest{};
+  RequestPass pass(frame, request, builder_, keyLists_);
+  try {
+    if (pass.run()) [[likely]] {
+      return DecodeVerdict::Ok;
+    }
+    return judge(frame, pass, refusal);
+  } catch (const std::bad_alloc&) {
+    builder_.reset();
+    request.dictionary = {};
+    refusal.code = ErrorCode::OutOfMemory;
+    refusal.text = kOutOfMemory;  // short enough to need none
+    return pass.hasID() ? DecodeVerdict::Refused : DecodeVerdict::Unreadable;
+  }
 }
 
 }  // namespace tarn::wire

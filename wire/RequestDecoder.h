@@ -12,7 +12,7 @@
 // Nesting deeper than a property list may have costs no stack, and little more memory than the frame itself.
 //
 // One decoder can serve all connections of a thread: it keeps nothing between frames but scratch space and the key
-// lists seen lately. Threads: one at a time. Throws nothing.
+// lists seen lately. Threads: one at a time. Throws nothing: a frame that memory is missing for is refused.
 #pragma once
 
 #include <cstddef>

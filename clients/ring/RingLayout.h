@@ -29,7 +29,8 @@ enum tarnring_refusal {
   TARNRING_NOT_PROPERTY_LIST = 3,
   TARNRING_UNREADABLE = 4,
   TARNRING_UNKNOWN_SHAPE = 5,
-  TARNRING_BAD_VALUES = 6
+  TARNRING_BAD_VALUES = 6,
+  TARNRING_OUT_OF_MEMORY = 7
 };
 
 /* Each writer's numbers have cache lines of their own; `asleep` has one because it is read at every post and written

@@ -19,8 +19,9 @@ inline constexpr platform::LogCategory kDriverCategory{"sys.oxbow.tarnkit", "tar
 // The performance traces and their analysis.
 inline constexpr platform::LogCategory kTraceCategory{"sys.oxbow.tarnkit", "tarnrt"};
 
+// Where memory is missing for the line, a short one stands in its place.
 void logPrefixed(platform::Log& log, const platform::LogCategory& category, platform::LogLevel level,
-                 std::string_view module, std::string_view text, int line = __builtin_LINE());
+                 std::string_view module, std::string_view text, int line = __builtin_LINE()) noexcept;
 
 // The text with the prefix of its module and line, as every line has it.
 std::string prefixed(std::string_view module, std::string_view text, int line = __builtin_LINE());

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <exception>
+#include <new>
 #include <utility>
 
 #include "host/log/PrefixedLog.h"
@@ -80,7 +81,15 @@ void QueuedLog::run() {
       writeAll(taken);
       mutex_.lock();
     } else if (lost_ != 0) {
-      const Texts told{lostLine(std::exchange(lost_, 0), std::exchange(lostError_, 0))};
+      Texts told;
+      try {
+        told.push_back(lostLine(lost_, lostError_));
+      } catch (const std::bad_alloc&) {  // told once there is the memory for it
+        work_.waitFor(mutex_, kFirstPause, [this]() TARN_REQUIRES(mutex_) { return stopping_; });
+        continue;
+      }
+      lost_ = 0;
+      lostError_ = 0;
       bytes_ += told.front().size();
       mutex_.unlock();
       writeAll(told);

@@ -4,17 +4,25 @@
 
 namespace tarn::linux_host {
 
-void Deadline::start(std::chrono::milliseconds after, platform::UniqueFunction<void()> isOver) {
-  thread_ = std::thread([this, after, isOver = std::move(isOver)]() mutable {
-    bool cancelled = false;
-    {
-      const MutexLock lock(mutex_);
-      cancelled = changed_.waitFor(mutex_, after, [this]() TARN_REQUIRES(mutex_) { return cancelled_; });
-    }
-    if (!cancelled) {
-      isOver();
-    }
-  });
+void Deadline::prepare(platform::UniqueFunction<void()> isOver) {
+  isOver_ = std::move(isOver);
+  thread_ = std::thread([this] { run(); });
+}
+
+void Deadline::start(std::chrono::milliseconds after) {
+  const MutexLock lock(mutex_);
+  after_ = after;
+  started_ = true;
+  changed_.notifyAll();
+}
+
+void Deadline::run() {
+  {
+    const MutexLock lock(mutex_);
+    changed_.wait(mutex_, [this]() TARN_REQUIRES(mutex_) { return started_ || cancelled_; });
+    if (changed_.waitFor(mutex_, after_, [this]() TARN_REQUIRES(mutex_) { return cancelled_; })) return;
+  }
+  isOver_();
 }
 
 void Deadline::cancel() {

@@ -1,6 +1,8 @@
 // Deadline: calls somebody when a time is up, whatever all other threads are at.
 //
-// Threads: start() and cancel() one; what is called runs on a thread of its own.
+// Its thread is made beforehand, so that the time can be set when the system has no more of anything to give.
+//
+// Threads: prepare(), start() and cancel() one; what is called runs on a thread of its own.
 #pragma once
 
 #include <chrono>
@@ -18,14 +20,21 @@ class Deadline {
   Deadline& operator=(const Deadline&) = delete;
   ~Deadline() { cancel(); }
 
-  // To be called once.
-  void start(std::chrono::milliseconds after, platform::UniqueFunction<void()> isOver);
+  // Makes the thread, once.
+  void prepare(platform::UniqueFunction<void()> isOver);
+  // Calls it after that time. Once.
+  void start(std::chrono::milliseconds after);
   // What wasn't called by now never is; what is being called is waited for.
   void cancel();
 
  private:
+  void run();
+
+  platform::UniqueFunction<void()> isOver_;
   Mutex mutex_;
   ConditionVariable changed_;
+  std::chrono::milliseconds after_ TARN_GUARDED_BY(mutex_){};
+  bool started_ TARN_GUARDED_BY(mutex_) = false;
   bool cancelled_ TARN_GUARDED_BY(mutex_) = false;
   std::thread thread_;
 };

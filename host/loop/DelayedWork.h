@@ -31,6 +31,8 @@ class DelayedWork {
     return static_cast<std::size_t>(
         std::count_if(heap_.begin(), heap_.end(), [now](const Entry& entry) { return entry.deadline <= now; }));
   }
+  // The earliest; only when there is one.
+  const Item& earliest() const noexcept { return heap_.front().item; }
   // Takes the earliest out.
   Item take() {
     std::pop_heap(heap_.begin(), heap_.end(), later);

@@ -47,7 +47,7 @@ std::shared_ptr<platform::WorkQueue> LinuxWorkQueues::makeSerialQueue(std::strin
 
 std::shared_ptr<platform::SuspendableQueue> LinuxWorkQueues::makeSuspendableQueue(std::string_view,
                                                                                   platform::QualityOfService) {
-  pool_->start(kThreads);
+  static_cast<void>(pool_->start(kThreads));
   return std::make_shared<PooledQueue>(pool_);
 }
 

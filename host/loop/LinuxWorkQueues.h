@@ -29,7 +29,10 @@ class LinuxWorkQueues final : public platform::WorkQueues {
   // Runs what is ready on the pool's queues, then ends the threads.
   ~LinuxWorkQueues() override;
 
-  // The threads are started with the first queue that needs them.
+  // Starts the threads before the first queue needs them. False when the system has none to give.
+  [[nodiscard]] bool start() { return pool_->start(kThreads); }
+
+  // Without start() the threads are started with the first queue that needs them.
   std::shared_ptr<platform::WorkQueue> makeSerialQueue(std::string_view name,
                                                        platform::QualityOfService quality) override;
   std::shared_ptr<platform::SuspendableQueue> makeSuspendableQueue(std::string_view name,

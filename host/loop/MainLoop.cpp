@@ -5,6 +5,7 @@
 #include <cerrno>
 #include <utility>
 
+#include "host/system/MemoryReserve.h"
 #include "host/system/SystemError.h"
 
 namespace tarn::linux_host {
@@ -42,6 +43,8 @@ MainLoop::~MainLoop() = default;
 Status MainLoop::watch(int descriptor, std::uint32_t events, std::shared_ptr<EventHandler> handler) {
   const auto index = static_cast<std::size_t>(descriptor);
   if (index >= slots_.size()) {
+    flushes_.reserve(index + 1);
+    flushing_.reserve(index + 1);
     slots_.resize(index + 1);
   }
   Slot& slot = slots_[index];
@@ -68,9 +71,12 @@ void MainLoop::unwatch(int descriptor) {
 
 void MainLoop::run() {
   while (!stopping_.load(std::memory_order_relaxed)) {
-    queue_->run(kPiecesPerTurn);
+    bool whole = MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, [this] { queue_->run(kPiecesPerTurn); });
     for (TurnHook& hook : hooks_) {
-      hook();
+      whole = MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, hook) && whole;
+    }
+    if (!whole) {
+      queue_->wake();  // what was left undone is looked at in the next turn, which nothing else may bring
     }
     flushAll();
     waitForEvents();
@@ -86,7 +92,7 @@ void MainLoop::stop() {
 void MainLoop::flushAll() {
   flushing_.swap(flushes_);
   for (const auto& handler : flushing_) {
-    handler->flush();
+    MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, [&] { handler->flush(); });
   }
   flushing_.clear();
 }
@@ -141,7 +147,7 @@ void MainLoop::dispatch(std::uint64_t token, std::uint32_t events) {
     return;  // closed earlier in this turn, and the number is another's by now
   }
   if (const std::shared_ptr<EventHandler> handler = slot.handler) {
-    handler->handleEvents(events);
+    MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, [&] { handler->handleEvents(events); });
   }
 }
 

@@ -59,18 +59,20 @@ class MainLoop {
   const platform::Clock& clock() const noexcept { return clock_; }
 
   // Calls the handler for these events of the descriptor until unwatch(). Fails when the system doesn't take it. A
-  // descriptor is unwatched before it is closed.
+  // descriptor is unwatched before it is closed. Without the memory for it nothing has changed.
   [[nodiscard]] Status watch(int descriptor, std::uint32_t events, std::shared_ptr<EventHandler> handler);
   void change(int descriptor, std::uint32_t events);
   void unwatch(int descriptor);
 
-  // Calls handler->flush() once, before the loop waits for events.
+  // Calls handler->flush() once, before the loop waits for events. Needs no memory for one that asks once and whose
+  // descriptor was watched: there is room for as many as there are descriptors.
   void flushLater(std::shared_ptr<EventHandler> handler) { flushes_.push_back(std::move(handler)); }
   // Flushes at once what waits for the turn's end, for a turn that has none because the process ends in it.
   void flushAll();
   void addTurnHook(TurnHook hook) { hooks_.push_back(std::move(hook)); }
 
-  // Serves until stop(). Replies that are ready by then are flushed; work that waits then is left.
+  // Serves until stop(). Replies that are ready by then are flushed; work that waits then is left. What memory is
+  // missing for ends where it began, as a piece of work, an event, a hook or a flush, and the next is served.
   void run();
   void stop();
 

@@ -2,10 +2,12 @@
 
 #include <sys/eventfd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <cstdint>
 
 #include "host/loop/CurrentQueue.h"
+#include "host/system/MemoryReserve.h"
 
 namespace tarn::linux_host {
 
@@ -13,6 +15,8 @@ namespace {
 
 // Room that a burst took is given back when it was for more pieces than this.
 constexpr std::size_t kKeptPieces = 16384;
+// Room that is made at once, in pieces.
+constexpr std::size_t kLeastRoom = 16;
 
 }  // namespace
 
@@ -83,12 +87,13 @@ std::size_t ServerQueue::run(std::size_t limit) {
     ready_.fetch_sub(1, std::memory_order_relaxed);
     progress_.step();
     const LogClientScope scope(piece.client);
-    piece.work();
+    MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, piece.work);
     ++count;
   }
   return count;
 }
 
+// What fails is the caller's, who knows whose lane it is.
 void ServerQueue::asyncIn(WorkLane& lane, platform::Work work) {
   lane.add(std::move(work));
   inLanes_.store(inLanes_.load(std::memory_order_relaxed) + 1, std::memory_order_relaxed);
@@ -136,6 +141,10 @@ bool ServerQueue::refill() {
   if (!delayed_.empty()) {
     const auto now = clock_.monotonic();
     while (delayed_.due(now)) {
+      // First the room: what was taken out and can't be put in would be lost.
+      if (incoming_.size() == incoming_.capacity()) {
+        incoming_.reserve(std::max(kLeastRoom, 2 * incoming_.size()));
+      }
       incoming_.push_back(delayed_.take());
       ready_.fetch_add(1, std::memory_order_relaxed);
     }

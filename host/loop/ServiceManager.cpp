@@ -2,7 +2,8 @@
 
 #include <systemd/sd-daemon.h>
 
-#include <string>
+#include <array>
+#include <cstdio>
 
 namespace tarn::linux_host {
 
@@ -11,8 +12,10 @@ void ServiceManager::notifyReady() {
 }
 
 void ServiceManager::notifyStopping(std::chrono::microseconds longest) {
-  const std::string told = "STOPPING=1\nEXTEND_TIMEOUT_USEC=" + std::to_string(longest.count());
-  sd_notify(0, told.c_str());
+  std::array<char, 64> told{};
+  static_cast<void>(std::snprintf(told.data(), told.size(), "STOPPING=1\nEXTEND_TIMEOUT_USEC=%lld",
+                                  static_cast<long long>(longest.count())));
+  sd_notify(0, told.data());
 }
 
 void ServiceManager::notifyWatchdog() {

@@ -31,7 +31,7 @@ class WorkLane {
   };
 
   // `queue` tells lanes of one queue from those of another.
-  explicit WorkLane(const platform::WorkQueue* queue) noexcept : queue_(queue) {}
+  explicit WorkLane(const platform::WorkQueue* queue) : queue_(queue) { pieces_.reserve(kRoom); }
   WorkLane(const WorkLane&) = delete;
   WorkLane& operator=(const WorkLane&) = delete;
 
@@ -66,6 +66,9 @@ class WorkLane {
   std::int64_t spent() const noexcept { return spent_; }
 
  private:
+  // For the pieces of the end, so that it never lacks the memory for them.
+  static constexpr std::size_t kRoom = 5;
+
   static inline thread_local WorkLane* current_ = nullptr;
 
   const platform::WorkQueue* queue_;

@@ -1,13 +1,12 @@
 #include "host/loop/WorkerPool.h"
 
 #include <algorithm>
-#include <cstdio>
-#include <cstdlib>
 #include <iterator>
 #include <set>
 #include <system_error>
 
 #include "host/loop/CurrentQueue.h"
+#include "host/system/MemoryReserve.h"
 
 namespace tarn::linux_host {
 
@@ -23,30 +22,29 @@ constexpr nanoseconds kLookAgain = std::chrono::microseconds(500);
 constexpr nanoseconds kLongestSleep = std::chrono::hours(1);
 // Room that a burst took is given back when it was for more pieces than this.
 constexpr std::size_t kKeptPieces = 16;
-
-// Work that is handed over must run; without a thread for it the process is of no use.
-[[noreturn]] void endForWantOfThreads() {
-  static_cast<void>(std::fputs("thread constructor failed\n", stderr));
-  std::abort();
-}
+// How long nobody takes up what is due when there is no memory for it.
+constexpr nanoseconds kShortagePause = std::chrono::milliseconds(1);
 
 void runOne(WorkerPool::Line& line, platform::Work work) {
   line.waiting.fetch_sub(1, std::memory_order_relaxed);
-  work();
+  MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, work);
 }
 
 }  // namespace
 
-void WorkerPool::start(std::size_t threads) {
+bool WorkerPool::start(std::size_t threads) {
   const MutexLock lock(mutex_);
-  if (!threads_.empty() || stopping_) return;
+  if (!threads_.empty() || stopping_) return true;
   try {
+    threads_.reserve(threads);
+    wakeUps_.reserve(threads);
     for (std::size_t i = 0; i < threads; ++i) {
       threads_.emplace_back([this] { serve(); });
     }
-  } catch (const std::system_error&) {
-    endForWantOfThreads();
+  } catch (const std::system_error&) {  // the system has no more threads
+  } catch (const std::bad_alloc&) {
   }
+  return !threads_.empty();
 }
 
 void WorkerPool::stop() {
@@ -105,11 +103,11 @@ void WorkerPool::addAfter(const std::shared_ptr<Line>& line, nanoseconds delay, 
 }
 
 void WorkerPool::suspend(const std::shared_ptr<Line>& line, nanoseconds longest, platform::Work next) {
-  line->interrupted = true;
   const MutexLock lock(mutex_);
   const auto moment = deadlineAfter(clock_.monotonic(), std::max(longest, nanoseconds::zero()));
-  line->next = std::move(next);
   line->suspension = suspensions_.emplace(std::pair(moment, nextSuspension_++), line).first;
+  line->interrupted = true;
+  line->next = std::move(next);
   countUnfinished();
   watchNextMoment();
 }
@@ -129,8 +127,7 @@ void WorkerPool::help(const std::shared_ptr<Line>& line, nanoseconds longest) {
   --helpers_;
   const auto place = std::find(runnable_.begin(), runnable_.end(), line);
   if (place != runnable_.end()) {
-    runnable_.erase(place);
-    runSome(line);
+    runSome(place);
   }
 }
 
@@ -191,7 +188,8 @@ void WorkerPool::countUnfinished() {
 
 void WorkerPool::schedule(const std::shared_ptr<Line>& line) {
   line->scheduled = true;
-  runnable_.push_back(line);
+  line->place.front() = line;
+  runnable_.splice(runnable_.end(), line->place);
   if (!looking_) {
     wakeOne();
   }
@@ -210,12 +208,28 @@ void WorkerPool::endSuspension(Suspensions::iterator suspension) {
 void WorkerPool::takeDue() {
   if (delayed_.empty() && suspensions_.empty()) return;
   const auto now = clock_.monotonic();
-  while (delayed_.due(now)) {
-    auto [line, work] = delayed_.take();
-    enqueue(line, std::move(work));
+  while (!takeDuePieces(now)) {
+    changed_.waitFor(mutex_, kShortagePause);
   }
   while (!suspensions_.empty() && suspensions_.begin()->first.first <= now) {
     endSuspension(suspensions_.begin());
+  }
+}
+
+// False without the memory for it; what wasn't taken is still there.
+bool WorkerPool::takeDuePieces(nanoseconds now) {
+  try {
+    while (delayed_.due(now)) {
+      std::vector<platform::Work>& incoming = delayed_.earliest().first->incoming;
+      if (incoming.size() == incoming.capacity()) {
+        incoming.reserve(2 * incoming.size() + 1);
+      }
+      auto [line, work] = delayed_.take();
+      enqueue(line, std::move(work));
+    }
+    return true;
+  } catch (const std::bad_alloc&) {
+    return false;
   }
 }
 
@@ -239,7 +253,8 @@ void WorkerPool::wakeOne() {
 // While a thread sleeps, one must wake by the earliest moment. Whoever is about to look goes to sleep knowing it.
 void WorkerPool::watchNextMoment() {
   const auto moment = nextMoment();
-  if (moment && !looking_ && (wakeUps_.empty() || *wakeUps_.begin() > *moment)) {
+  if (moment && !looking_ &&
+      std::none_of(wakeUps_.begin(), wakeUps_.end(), [&](nanoseconds wakeUp) { return wakeUp <= *moment; })) {
     wakeOne();
   }
 }
@@ -250,16 +265,15 @@ void WorkerPool::serve() {
   for (;;) {
     takeDue();
     if (!runnable_.empty()) {
-      const auto line = std::move(runnable_.front());
-      runnable_.pop_front();
+      const auto place = runnable_.begin();
       // Another for what this thread leaves: more work, or a moment that nobody would wait for.
-      if (!runnable_.empty()) {
+      if (std::next(place) != runnable_.end()) {
         wakeOne();
       } else {
         watchNextMoment();
       }
       worked = true;
-      runSome(line);
+      runSome(place);
     } else if (stopping_) {
       return;
     } else if (std::exchange(worked, false) && !looking_) {
@@ -282,18 +296,21 @@ void WorkerPool::look() {
 
 void WorkerPool::sleep() {
   const auto moment = nextMoment();
-  const auto wakeUp = wakeUps_.insert(moment.value_or(nanoseconds::max()));
+  const nanoseconds wakeUp = moment.value_or(nanoseconds::max());
+  wakeUps_.push_back(wakeUp);
   if (moment) {
     changed_.waitFor(mutex_, std::min(*moment - clock_.monotonic(), kLongestSleep));
   } else {
     changed_.wait(mutex_);
   }
-  wakeUps_.erase(wakeUp);
+  wakeUps_.erase(std::find(wakeUps_.begin(), wakeUps_.end(), wakeUp));
 }
 
-void WorkerPool::runSome(const std::shared_ptr<Line>& line) {
+// Of the line that stands there in the pool's line.
+void WorkerPool::runSome(Lines::iterator place) {
+  running_.splice(running_.end(), runnable_, place);
+  const std::shared_ptr<Line> line = *place;
   line->running = true;
-  running_.push_back(line);
   platform::Work next = std::move(line->next);
   if (line->position == line->taken.size()) {
     line->taken.clear();
@@ -304,14 +321,16 @@ void WorkerPool::runSome(const std::shared_ptr<Line>& line) {
   const std::size_t finished = runTurn(*line, std::move(next));
   mutex_.lock();
   line->running = false;
-  running_.erase(std::find(running_.begin(), running_.end(), line));
   if (helpers_ > 0) {
     turnEnded_.notifyAll();
   }
   const bool more = line->next || line->position < line->taken.size() || !line->incoming.empty();
   line->scheduled = more && !line->suspension;
   if (line->scheduled) {
-    runnable_.push_back(line);
+    runnable_.splice(runnable_.end(), running_, place);
+  } else {
+    line->place.splice(line->place.end(), running_, place);
+    line->place.front() = nullptr;
   }
   account(finished);
 }

@@ -10,6 +10,9 @@
 // is about to look, nobody is woken. Whoever finds more than it can do alone wakes another. Work that is urgent ends
 // the look at once.
 //
+// Scheduling takes no memory: a line's place in the pool's lists is made with the line. Without memory nothing is
+// handed over; a piece that runs out of it is given up, and the next one runs.
+//
 // Owned by LinuxWorkQueues; queues hold it too, as they may outlive that. Threads: any.
 #pragma once
 
@@ -17,11 +20,10 @@
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
-#include <deque>
+#include <list>
 #include <map>
 #include <memory>
 #include <optional>
-#include <set>
 #include <thread>
 #include <utility>
 #include <vector>
@@ -55,8 +57,9 @@ class WorkerPool {
   // Called each time isFull() has become false again, on a thread of the pool or on that of whoever helps. Set before
   // start().
   void setRoomHandler(RoomHandler handler) { roomHandler_ = std::move(handler); }
-  // Starts the threads, once; later calls do nothing. A system that has no more threads to give ends the process.
-  void start(std::size_t threads);
+  // Starts the threads, once. Fewer will do when the system has no more to give; false when there is none, and then
+  // what is handed over waits until a later call gets one.
+  [[nodiscard]] bool start(std::size_t threads);
   // Runs what is ready, then ends the threads. What is delayed, what is suspended and what comes later is destroyed
   // uncalled.
   void stop();
@@ -82,6 +85,7 @@ class WorkerPool {
 
  private:
   using Delayed = std::pair<std::shared_ptr<Line>, platform::Work>;
+  using Lines = std::list<std::shared_ptr<Line>>;
   // By deadline, equal ones in the order of the calls.
   using Suspensions = std::map<std::pair<std::chrono::nanoseconds, std::uint64_t>, std::shared_ptr<Line>>;
 
@@ -92,13 +96,14 @@ class WorkerPool {
   void schedule(const std::shared_ptr<Line>& line) TARN_REQUIRES(mutex_);
   void endSuspension(Suspensions::iterator suspension) TARN_REQUIRES(mutex_);
   void takeDue() TARN_REQUIRES(mutex_);
+  bool takeDuePieces(std::chrono::nanoseconds now) TARN_REQUIRES(mutex_);
   std::optional<std::chrono::nanoseconds> nextMoment() const TARN_REQUIRES(mutex_);
   void countUnfinished() TARN_REQUIRES(mutex_);
   void wakeOne() TARN_REQUIRES(mutex_);
   void watchNextMoment() TARN_REQUIRES(mutex_);
   void look() TARN_REQUIRES(mutex_);
   void sleep() TARN_REQUIRES(mutex_);
-  void runSome(const std::shared_ptr<Line>& line) TARN_REQUIRES(mutex_);
+  void runSome(Lines::iterator place) TARN_REQUIRES(mutex_);
   void account(std::size_t finished) TARN_REQUIRES(mutex_);
 
   const platform::Clock& clock_;
@@ -111,15 +116,15 @@ class WorkerPool {
   ConditionVariable settled_;
   ConditionVariable turnEnded_;  // for those who help
   std::size_t helpers_ TARN_GUARDED_BY(mutex_) = 0;
-  std::deque<std::shared_ptr<Line>> runnable_ TARN_GUARDED_BY(mutex_);
-  std::vector<std::shared_ptr<Line>> running_ TARN_GUARDED_BY(mutex_);
+  Lines runnable_ TARN_GUARDED_BY(mutex_);
+  Lines running_ TARN_GUARDED_BY(mutex_);
   DelayedWork<Delayed> delayed_ TARN_GUARDED_BY(mutex_);
   Suspensions suspensions_ TARN_GUARDED_BY(mutex_);
   std::uint64_t nextSuspension_ TARN_GUARDED_BY(mutex_) = 0;
   std::size_t unfinished_ TARN_GUARDED_BY(mutex_) = 0;
   std::vector<std::thread> threads_ TARN_GUARDED_BY(mutex_);
-  // Of the sleepers: when each wakes at the latest.
-  std::multiset<std::chrono::nanoseconds> wakeUps_ TARN_GUARDED_BY(mutex_);
+  // Of the sleepers: when each wakes at the latest. There is room for one of each thread.
+  std::vector<std::chrono::nanoseconds> wakeUps_ TARN_GUARDED_BY(mutex_);
   bool looking_ TARN_GUARDED_BY(mutex_) = false;
   bool stopping_ TARN_GUARDED_BY(mutex_) = false;
   bool over_ TARN_GUARDED_BY(mutex_) = false;  // the threads are gone
@@ -128,6 +133,7 @@ class WorkerPool {
 // The state of one queue. Lives as long as the queue or work for it.
 struct WorkerPool::Line {
   // Under the pool's lock.
+  Lines place{nullptr};  // what stands for it in the pool's lists; it is here while it is in none
   std::vector<platform::Work> incoming;
   platform::Work next;  // what runs first when a suspension is over
   std::optional<Suspensions::iterator> suspension;

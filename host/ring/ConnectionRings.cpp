@@ -8,6 +8,7 @@
 
 #include "host/log/PrefixedLog.h"
 #include "host/ring/RingBoard.h"
+#include "host/system/MemoryReserve.h"
 
 namespace tarn::linux_host {
 
@@ -43,12 +44,15 @@ Result<std::uint64_t> ConnectionRings::open(std::vector<UniqueDescriptor> descri
                                                        self->wake(woken);
                                                      }
                                                    });
+  // First what needs memory: from then on it is watched and closed as a whole.
+  buffer_.resize(std::max<std::size_t>(buffer_.size(), reader->consumer().mostContent()));
+  rings_.reserve(rings_.size() + 1);
+  served_.reserve(rings_.size() + 1);
   // By the edge: nobody reads it, so it stays ready.
   if (board_.loop.watch(reader->wakeDescriptor(), EPOLLIN | EPOLLET, reader).failed()) {
     return {0, refuse(RingFault::System)};
   }
   reader->lastRecord = board_.loop.clock().monotonic();
-  buffer_.resize(std::max<std::size_t>(buffer_.size(), reader->consumer().mostContent()));
   rings_.push_back(reader);
   ++board_.counts.open;
   ++board_.counts.opened;
@@ -111,7 +115,7 @@ bool ConnectionRings::has(const RingIdentity& identity) const noexcept {
 
 bool ConnectionRings::serveTurn(std::chrono::nanoseconds now) {
   std::size_t share = board_.limits.turnBytes;
-  std::vector<std::shared_ptr<RingReader>> served;
+  served_.clear();
   for (std::size_t i = 0; i < rings_.size(); ++i) {
     const auto reader = rings_[(first_ + i) % rings_.size()];
     if (reader->asleep) continue;
@@ -122,7 +126,7 @@ bool ConnectionRings::serveTurn(std::chrono::nanoseconds now) {
     board_.counts.droppedByClients += dropped;
     if (reader->consumer().taken() != before) {
       reader->consumer().publish();
-      served.push_back(reader);
+      served_.push_back(reader);
     }
     if (held || reader->consumer().taken() != before) {
       reader->lastRecord = now;
@@ -131,7 +135,7 @@ bool ConnectionRings::serveTurn(std::chrono::nanoseconds now) {
     }
   }
   first_ = rings_.empty() ? 0 : (first_ + 1) % rings_.size();
-  noteDoneAfterTheWork(served);
+  noteDoneAfterTheWork();
   follow();
   closeFinished();
   return share == 0;
@@ -181,7 +185,12 @@ ConnectionRings::Step ConnectionRings::serveRecord(RingReader& reader, RingOwner
     step = Step::Held;
   } else {
     const std::span<const std::byte> content(buffer_.data(), record.length);
-    step = record.kind == TARNRING_MESSAGE ? serveMessage(reader, owner, content) : serveFrame(reader, owner, content);
+    try {
+      step =
+          record.kind == TARNRING_MESSAGE ? serveMessage(reader, owner, content) : serveFrame(reader, owner, content);
+    } catch (const std::bad_alloc&) {
+      step = Step::Held;  // it waits in the ring until there is memory for it
+    }
   }
   if (step == Step::Served) {
     reader.consumer().accept(record);
@@ -192,7 +201,7 @@ ConnectionRings::Step ConnectionRings::serveRecord(RingReader& reader, RingOwner
 
 ConnectionRings::Step ConnectionRings::serveMessage(RingReader& reader, RingOwner& owner,
                                                     std::span<const std::byte> content) {
-  switch (shapes_.decode(content, board_.request)) {
+  switch (decodeMessage(content)) {
     case ShapeTable::Decoded::UnknownShape:
       // It may be on its way on the socket still.
       return reader.ending() ? refuseRecord(reader, TARNRING_UNKNOWN_SHAPE) : Step::Held;
@@ -201,9 +210,20 @@ ConnectionRings::Step ConnectionRings::serveMessage(RingReader& reader, RingOwne
     case ShapeTable::Decoded::Ok:
       break;
   }
-  ++board_.counts.messages;
-  owner.serveRingRequest(board_.request);
-  return Step::Served;
+  return serveRequest(reader, owner);
+}
+
+ShapeTable::Decoded ConnectionRings::decodeMessage(std::span<const std::byte> content) {
+  const MemoryReserve::Refusable refusable;
+  return shapes_.decode(content, board_.request);
+}
+
+// Once it is handed over it can't be taken back to be tried again.
+ConnectionRings::Step ConnectionRings::serveRequest(RingReader& reader, RingOwner& owner) {
+  board_.counts.messages += board_.request.operation == wire::Operation::SendMessage ? 1 : 0;
+  const bool taken =
+      MemoryReserve::orGiveUp(MemoryReserve::Loss::Request, [&] { owner.serveRingRequest(board_.request); });
+  return taken ? Step::Served : refuseRecord(reader, TARNRING_OUT_OF_MEMORY);
 }
 
 ConnectionRings::Step ConnectionRings::serveFrame(RingReader& reader, RingOwner& owner,
@@ -212,6 +232,7 @@ ConnectionRings::Step ConnectionRings::serveFrame(RingReader& reader, RingOwner&
     case wire::DecodeVerdict::Unreadable:
       return refuseRecord(reader, TARNRING_UNREADABLE);
     case wire::DecodeVerdict::Refused:
+      if (board_.refusal.code == wire::ErrorCode::OutOfMemory) return Step::Held;  // it waits until there is some
       return refuseRecord(reader, refusalOf(board_.refusal.code));
     case wire::DecodeVerdict::Ok:
       break;
@@ -223,9 +244,7 @@ ConnectionRings::Step ConnectionRings::serveFrame(RingReader& reader, RingOwner&
   if (wire::rowOf(board_.request.operation).servedBy == wire::ServedBy::Host) {
     return refuseRecord(reader, TARNRING_UNKNOWN_OPERATION);
   }
-  board_.counts.messages += board_.request.operation == wire::Operation::SendMessage ? 1 : 0;
-  owner.serveRingRequest(board_.request);
-  return Step::Served;
+  return serveRequest(reader, owner);
 }
 
 // Counted, and gone on with.
@@ -236,13 +255,13 @@ ConnectionRings::Step ConnectionRings::refuseRecord(RingReader& reader, tarnring
 }
 
 // Once the work that the records became has run, the recorder has got what comes of it.
-void ConnectionRings::noteDoneAfterTheWork(const std::vector<std::shared_ptr<RingReader>>& served) {
+void ConnectionRings::noteDoneAfterTheWork() {
   const auto owner = owner_.lock();
-  for (const auto& reader : served) {
+  for (const auto& reader : served_) {
     if (owner == nullptr) return;
-    reader->noteAsked();
     owner->afterRingRequests([reader, position = reader->consumer().taken(),
                               messages = reader->consumer().takenMessages()] { reader->noteDone(position, messages); });
+    reader->noteAsked();
   }
 }
 
@@ -271,9 +290,11 @@ void ConnectionRings::closeFinished() {
   if (!ending_ || !rings_.empty() || !drained_) return;
   const auto owner = owner_.lock();
   if (dropped_ != 0 && owner != nullptr) {
-    logPrefixed(
-        board_.log, kConnectionCategory, platform::LogLevel::Default, kModule,
-        owner->description() + " dropped " + std::to_string(dropped_) + " messages for want of room in its rings");
+    MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, [&] {
+      logPrefixed(
+          board_.log, kConnectionCategory, platform::LogLevel::Default, kModule,
+          owner->description() + " dropped " + std::to_string(dropped_) + " messages for want of room in its rings");
+    });
   }
   std::exchange(drained_, {})();
 }

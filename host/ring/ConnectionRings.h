@@ -73,6 +73,8 @@ class ConnectionRings : public std::enable_shared_from_this<ConnectionRings> {
   bool serveRing(RingReader& reader, std::size_t& share);
   Step serveRecord(RingReader& reader, RingOwner& owner, std::size_t& share);
   Step serveMessage(RingReader& reader, RingOwner& owner, std::span<const std::byte> content);
+  ShapeTable::Decoded decodeMessage(std::span<const std::byte> content);
+  Step serveRequest(RingReader& reader, RingOwner& owner);
   Step serveFrame(RingReader& reader, RingOwner& owner, std::span<const std::byte> content);
   Step refuseRecord(RingReader& reader, tarnring_refusal reason);
   void close(RingReader& reader);
@@ -80,14 +82,15 @@ class ConnectionRings : public std::enable_shared_from_this<ConnectionRings> {
   void rest(RingReader& reader, std::chrono::nanoseconds now);
   void wake(RingReader& reader);
   void follow();
-  void noteDoneAfterTheWork(const std::vector<std::shared_ptr<RingReader>>& served);
+  void noteDoneAfterTheWork();
 
   RingBoard& board_;
   std::weak_ptr<RingOwner> owner_;
   ShapeTable shapes_;
   std::vector<std::shared_ptr<RingReader>> rings_;
-  std::vector<std::byte> buffer_;  // a record's content
-  std::size_t first_ = 0;          // whose turn it is to be served first
+  std::vector<std::shared_ptr<RingReader>> served_;  // in this turn
+  std::vector<std::byte> buffer_;                    // a record's content
+  std::size_t first_ = 0;                            // whose turn it is to be served first
   std::uint64_t nextNumber_ = 1;
   std::uint64_t dropped_ = 0;
   Drained drained_;

@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <utility>
 
+#include "host/system/MemoryReserve.h"
+
 namespace tarn::linux_host {
 
 namespace {
@@ -23,6 +25,9 @@ std::shared_ptr<ConnectionRings> RingBoard::connect(std::weak_ptr<RingOwner> own
   std::erase_if(all_, [](const auto& rings) { return rings.expired(); });
   auto rings = std::make_shared<ConnectionRings>(*this, std::move(owner));
   all_.push_back(rings);
+  // Room for all of them, so that none is ever left out of a turn.
+  active_.reserve(all_.size());
+  turn_.reserve(all_.size());
   return rings;
 }
 
@@ -44,23 +49,19 @@ void RingBoard::look() {
   if (active_.empty()) return;
   const std::chrono::nanoseconds now = loop.clock().monotonic();
   // What is activated meanwhile comes with the next turn.
-  const auto turn = std::exchange(active_, {});
+  turn_.swap(active_);
   bool more = false;
-  for (const auto& rings : turn) {
-    more = rings->serveTurn(now) || more;
+  for (const auto& rings : turn_) {
+    MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, [&] { more = rings->serveTurn(now) || more; });
   }
-  std::vector<std::shared_ptr<ConnectionRings>> still;
-  for (const auto& rings : turn) {
-    if (rings->isActive()) {
-      still.push_back(rings);
-    }
-  }
+  std::erase_if(turn_, [](const auto& rings) { return !rings->isActive(); });
   for (auto& rings : active_) {
-    if (std::find(still.begin(), still.end(), rings) == still.end()) {
-      still.push_back(std::move(rings));
+    if (std::find(turn_.begin(), turn_.end(), rings) == turn_.end()) {
+      turn_.push_back(std::move(rings));
     }
   }
-  active_ = std::move(still);
+  active_.swap(turn_);
+  turn_.clear();
   if (more) {
     loop.queue()->wake();
   } else {
@@ -72,13 +73,19 @@ void RingBoard::armTimer(std::chrono::nanoseconds now) {
   const bool awake = std::any_of(active_.begin(), active_.end(), [](const auto& rings) { return rings->isAwake(); });
   const std::chrono::nanoseconds wait = awake ? limits.lookEvery : kPatience * limits.lookEvery;
   if (active_.empty() || nextLook_ <= now + wait) return;
-  nextLook_ = now + wait;
-  loop.queue()->asyncAfter(wait, [weak = std::weak_ptr(self_), moment = nextLook_] {
-    const auto board = weak.lock();
-    if (board != nullptr && (*board)->nextLook_ == moment) {
-      (*board)->nextLook_ = std::chrono::nanoseconds::max();  // the turn's hook looks
-    }
+  const bool armed = MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, [&] {
+    loop.queue()->asyncAfter(wait, [weak = std::weak_ptr(self_), moment = now + wait] {
+      const auto board = weak.lock();
+      if (board != nullptr && (*board)->nextLook_ == moment) {
+        (*board)->nextLook_ = std::chrono::nanoseconds::max();  // the turn's hook looks
+      }
+    });
   });
+  if (armed) {
+    nextLook_ = now + wait;
+  } else {
+    loop.queue()->wake();  // the next turn looks
+  }
 }
 
 }  // namespace tarn::linux_host

@@ -59,6 +59,7 @@ class RingBoard {
   CommitSource commits_;
   std::vector<std::weak_ptr<ConnectionRings>> all_;
   std::vector<std::shared_ptr<ConnectionRings>> active_;
+  std::vector<std::shared_ptr<ConnectionRings>> turn_;                           // those whose turn it is
   std::chrono::nanoseconds nextLook_ = std::chrono::nanoseconds::max();          // for which the timer is set
   const std::shared_ptr<RingBoard*> self_ = std::make_shared<RingBoard*>(this);  // for the timer, which may outlive us
 };

@@ -7,7 +7,8 @@ namespace tarn::linux_host {
 namespace {
 
 constexpr std::array<std::string_view, kRingRefusals> kRefusalNames{
-    "unknown_operation", "bad_arguments", "not_property_list", "unreadable", "unknown_shape", "bad_values"};
+    "unknown_operation", "bad_arguments", "not_property_list", "unreadable",
+    "unknown_shape",     "bad_values",    "out_of_memory"};
 
 struct FaultRow {
   std::string_view name;

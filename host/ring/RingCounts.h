@@ -24,7 +24,7 @@ enum class RingFault : std::uint8_t {
   Broken,   // open: positions or lengths that make no sense
 };
 inline constexpr std::size_t kRingFaults = 8;
-inline constexpr std::size_t kRingRefusals = TARNRING_BAD_VALUES;
+inline constexpr std::size_t kRingRefusals = TARNRING_OUT_OF_MEMORY;
 
 struct RingCounts {
   std::uint64_t open = 0;

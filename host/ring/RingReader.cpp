@@ -17,7 +17,9 @@ RingReader::RingReader(RingMemory memory, UniqueDescriptor wake, std::uint64_t f
       wake_(std::move(wake)),
       consumer_(memory_.header(), memory_.data(), memory_.dataBytes(), firstSleep),
       onWake_(std::move(onWake)),
-      dropped_(consumer_.dropped()) {}
+      dropped_(consumer_.dropped()) {
+  marks_.reserve(kMostMarks);
+}
 
 void RingReader::handleEvents(std::uint32_t) {
   onWake_(*this);
@@ -50,7 +52,7 @@ void RingReader::follow(const CommitPoint& point) noexcept {
   while (!marks_.empty() && marks_.front().handedOver <= point.committed) {
     reached = marks_.front();
     last = &reached;
-    marks_.pop_front();
+    marks_.erase(marks_.begin());
   }
   if (last != nullptr) {
     consumer_.publishCommitted(last->position, last->messages);

@@ -6,8 +6,8 @@
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
-#include <deque>
 #include <optional>
+#include <vector>
 
 #include "clients/ring/RingConsumer.h"
 #include "host/loop/MainLoop.h"
@@ -79,7 +79,7 @@ class RingReader final : public EventHandler {
   std::optional<std::uint64_t> end_;
   std::size_t asked_ = 0;
   std::optional<Mark> done_;  // not handed over yet, as far as is known
-  std::deque<Mark> marks_;
+  std::vector<Mark> marks_;   // with room for all that may be there
 };
 
 }  // namespace tarn::linux_host

@@ -182,6 +182,7 @@ ShapeTable::Decoded ShapeTable::decode(std::span<const std::byte> content, wire:
   const Shape& shape = *shapes_[head.shape];
   ValueWords words(content.subspan(sizeof head));
   bool fits = head.count == shape.kinds.size();
+  builder_.reset();  // of one that memory was missing for
   builder_.begin();
   for (auto kind = shape.kinds.begin(); fits && kind != shape.kinds.end(); ++kind) {
     plist::ValueView value;

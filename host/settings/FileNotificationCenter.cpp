@@ -139,12 +139,17 @@ void FileNotificationCenter::deliverAll() {
 
 void FileNotificationCenter::handOver(const std::shared_ptr<Entry>& entry) {
   if (std::exchange(entry->waiting, true)) return;
-  entry->queue->async([entry] {
-    entry->waiting = false;
-    if (!entry->cancelled) {
-      entry->handler(entry->token);
-    }
-  });
+  try {
+    entry->queue->async([entry] {
+      entry->waiting = false;
+      if (!entry->cancelled) {
+        entry->handler(entry->token);
+      }
+    });
+  } catch (...) {
+    entry->waiting = false;  // or it would never be told again
+    throw;
+  }
 }
 
 }  // namespace tarn::linux_host

@@ -16,6 +16,7 @@
 #include "host/socket/HostLimits.h"
 #include "host/socket/Ledger.h"
 #include "host/socket/Quotas.h"
+#include "host/system/MemoryReserve.h"
 #include "platform/Log.h"
 #include "platform/UniqueFunction.h"
 #include "wire/RequestDecoder.h"
@@ -90,17 +91,18 @@ class ConnectionHost {
     if (halfFrames.overfull()) {
       halfFrames.sweep(loop.clock().monotonic());
     }
-    if (halfFrames.empty() || std::exchange(watchesHalfFrames_, true)) return;
+    if (halfFrames.empty() || watchesHalfFrames_) return;
     const WorkLane::Scope nobodys(nullptr);
     loop.queue()->asyncAfter(limits.halfFrameTime / kLooksAtHalfFrames, [this] {
       watchesHalfFrames_ = false;
       if (gate.open()) {
-        halfFrames.sweep(loop.clock().monotonic());
+        MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, [this] { halfFrames.sweep(loop.clock().monotonic()); });
       } else {
         halfFrames.restart(loop.clock().monotonic());
       }
       watchHalfFrames();
     });
+    watchesHalfFrames_ = true;
   }
 
   // Tells that the pause source's answer changed. Threads: any.

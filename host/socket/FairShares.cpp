@@ -25,14 +25,33 @@ std::shared_ptr<ShareParty> FairShares::partyOf(std::uint32_t user) {
   return party;
 }
 
-void FairShares::ready(const std::shared_ptr<ShareHolder>& holder) {
+void FairShares::ready(const std::shared_ptr<ShareHolder>& holder) noexcept {
   if (std::exchange(holder->queued_, true)) return;
   const std::shared_ptr<ShareParty>& party = holder->party_;
-  (holder->credit_ < 0 ? party->seats : party->fresh).push_back(holder);
+  join(holder->credit_ < 0 ? party->seats : party->fresh, holder);
   if (!std::exchange(party->queued, true)) {
     party->credit = std::min(party->credit + kQuantum, kQuantum);
-    parties_.push_back(party);
+    party->place.front() = party;
+    parties_.splice(parties_.end(), party->place);
   }
+}
+
+void FairShares::join(Holders& line, const std::shared_ptr<ShareHolder>& holder) noexcept {
+  holder->place_.front() = holder;
+  line.splice(line.end(), holder->place_);
+}
+
+std::shared_ptr<ShareHolder> FairShares::takeFirst(Holders& line) noexcept {
+  std::shared_ptr<ShareHolder> holder = std::move(line.front());
+  holder->place_.splice(holder->place_.end(), line, line.begin());
+  return holder;
+}
+
+// The user has nothing more to do.
+void FairShares::leave(const std::shared_ptr<ShareParty>& party) noexcept {
+  party->queued = false;
+  party->place.splice(party->place.end(), parties_, std::find(parties_.begin(), parties_.end(), party));
+  party->place.front() = nullptr;
 }
 
 // One turn of the first user's next seat; its cost. Both go to the end of their lines when their credit is spent.
@@ -45,12 +64,10 @@ std::int64_t FairShares::serveOne() {
   }
   const bool takesFresh = !party->fresh.empty() && (party->seats.empty() || party->freshTurns < kFreshTurns);
   party->freshTurns = takesFresh ? party->freshTurns + 1 : 0;
-  auto& line = takesFresh ? party->fresh : party->seats;
-  const std::shared_ptr<ShareHolder> holder = std::move(line.front());
-  line.pop_front();
+  const std::shared_ptr<ShareHolder> holder = takeFirst(takesFresh ? party->fresh : party->seats);
   holder->credit_ = std::min(holder->credit_ + kQuantum, kQuantum);
   if (holder->credit_ <= 0) {
-    party->seats.push_back(holder);
+    join(party->seats, holder);
     return 1;
   }
   holder->queued_ = false;  // what comes for it while it is served counts as more
@@ -59,11 +76,10 @@ std::int64_t FairShares::serveOne() {
   holder->credit_ = std::max(holder->credit_ - turn.cost, -kMostDebt);
   party->credit = std::max(party->credit - turn.cost, -kMostDebt);
   if (turn.more && !std::exchange(holder->queued_, true)) {
-    party->seats.push_back(holder);
+    join(party->seats, holder);
   }
   if (party->fresh.empty() && party->seats.empty()) {
-    party->queued = false;
-    parties_.erase(std::find(parties_.begin(), parties_.end(), party));
+    leave(party);
   }
   return std::max<std::int64_t>(turn.cost, 1);
 }
@@ -80,8 +96,8 @@ ShareHolder::Turn FairShares::serve(const ShareParty& party, ShareHolder& holder
   return holder.takeTurn(holder.credit_);
 }
 
-void FairShares::passOver() {
-  std::rotate(parties_.begin(), parties_.begin() + 1, parties_.end());
+void FairShares::passOver() noexcept {
+  parties_.splice(parties_.end(), parties_, parties_.begin());
 }
 
 std::int64_t FairShares::latelyOf(const ShareParty& party) const noexcept {
@@ -101,14 +117,17 @@ void FairShares::noteDone(ShareParty& party, std::int64_t cost) noexcept {
 }
 
 void FairShares::finishWork() {
-  for (const auto& party : std::exchange(parties_, {})) {
-    party->queued = false;
-    for (auto* line : {&party->fresh, &party->seats}) {
-      for (const auto& holder : std::exchange(*line, {})) {
+  for (std::size_t parties = parties_.size(); parties > 0; --parties) {
+    const std::shared_ptr<ShareParty> party = parties_.front();
+    for (Holders* const line : {&party->fresh, &party->seats}) {
+      // Those that stand in it now: what comes of their work finds nobody to serve it.
+      for (std::size_t left = line->size(); left > 0; --left) {
+        const std::shared_ptr<ShareHolder> holder = takeFirst(*line);
         holder->queued_ = false;
         holder->finishWork();
       }
     }
+    leave(party);
   }
 }
 

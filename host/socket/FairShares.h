@@ -12,6 +12,8 @@
 // it is served on and on. Who comes back and owes nothing is served ahead of the user's others, so that a request now
 // and then doesn't wait for a thousand connections that are busy all the time; every few turns one of those is served.
 //
+// Taking a place in a line needs no memory: each holder and each user brings its own along.
+//
 // What a user took of what was done lately is remembered, so that who took much waits first when room gets scarce.
 //
 // Owned by ConnectionHost. Threads: the main loop's.
@@ -19,7 +21,7 @@
 
 #include <cstddef>
 #include <cstdint>
-#include <deque>
+#include <list>
 #include <memory>
 #include <unordered_map>
 #include <utility>
@@ -36,7 +38,7 @@ struct MessageRate {
 
 // What one user's connections have in common.
 struct ShareParty {
-  explicit ShareParty(std::uint32_t theUser) noexcept : user(theUser) {}
+  explicit ShareParty(std::uint32_t theUser) : user(theUser) {}
 
   const std::uint32_t user;
   // What they have, for the quotas.
@@ -51,9 +53,10 @@ struct ShareParty {
 
   std::int64_t credit = 0;
   bool queued = false;
-  std::deque<std::shared_ptr<ShareHolder>> fresh;  // those that have something to do again
-  std::deque<std::shared_ptr<ShareHolder>> seats;  // those that have something to do still
-  int freshTurns = 0;                              // since one of the seats was served
+  std::list<std::shared_ptr<ShareParty>> place{nullptr};  // what stands for it in the line of users, while not in it
+  std::list<std::shared_ptr<ShareHolder>> fresh;          // those that have something to do again
+  std::list<std::shared_ptr<ShareHolder>> seats;          // those that have something to do still
+  int freshTurns = 0;                                     // since one of the seats was served
 };
 
 class ShareHolder {
@@ -63,14 +66,15 @@ class ShareHolder {
     bool more;  // it has more to do
   };
 
-  explicit ShareHolder(std::shared_ptr<ShareParty> party) noexcept : party_(std::move(party)) {}
+  explicit ShareHolder(std::shared_ptr<ShareParty> party) : party_(std::move(party)) {}
   ShareHolder(const ShareHolder&) = delete;
   ShareHolder& operator=(const ShareHolder&) = delete;
   virtual ~ShareHolder() = default;
 
-  // Does what it has to do until that cost `credit` or more, or there is none left.
+  // Does what it has to do until that cost `credit` or more, or there is none left. Throws nothing.
   virtual Turn takeTurn(std::int64_t credit) = 0;
-  // Does at once what was begun or handed over for it, and takes nothing new up; for the end of the process.
+  // Does at once what was begun or handed over for it, and takes nothing new up; for the end of the process. Throws
+  // nothing.
   virtual void finishWork() = 0;
 
  protected:
@@ -82,6 +86,7 @@ class ShareHolder {
   friend class FairShares;
 
   const std::shared_ptr<ShareParty> party_;
+  std::list<std::shared_ptr<ShareHolder>> place_{nullptr};  // what stands for it in a line, while it is in none
   std::int64_t credit_ = 0;
   bool queued_ = false;
 };
@@ -106,7 +111,7 @@ class FairShares {
   // The user's own, shared by all holders that live.
   std::shared_ptr<ShareParty> partyOf(std::uint32_t user);
   // Something came for the holder to do. Cheap when it waits for a turn already.
-  void ready(const std::shared_ptr<ShareHolder>& holder);
+  void ready(const std::shared_ptr<ShareHolder>& holder) noexcept;
   // Gives turns until they cost `budget` or more, or nobody has anything to do. `mayServe(party)` is asked before each
   // turn of a user. Whether somebody is left who could go on at once.
   template <class MayServe>
@@ -141,13 +146,18 @@ class FairShares {
   }
 
  private:
+  using Holders = std::list<std::shared_ptr<ShareHolder>>;
+
   std::int64_t serveOne();
   ShareHolder::Turn serve(const ShareParty& party, ShareHolder& holder);
-  void passOver();
+  void passOver() noexcept;
   std::int64_t latelyOf(const ShareParty& party) const noexcept;
   void noteDone(ShareParty& party, std::int64_t cost) noexcept;
+  static void join(Holders& line, const std::shared_ptr<ShareHolder>& holder) noexcept;
+  static std::shared_ptr<ShareHolder> takeFirst(Holders& line) noexcept;
+  void leave(const std::shared_ptr<ShareParty>& party) noexcept;
 
-  std::deque<std::shared_ptr<ShareParty>> parties_;  // the one whose visit it is comes first
+  std::list<std::shared_ptr<ShareParty>> parties_;  // the one whose visit it is comes first
   std::unordered_map<std::uint32_t, std::weak_ptr<ShareParty>> byUser_;
   const ShareParty* served_ = nullptr;
   std::int64_t lately_ = 0;  // of all users together

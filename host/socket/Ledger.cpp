@@ -7,10 +7,10 @@ namespace tarn::linux_host {
 
 namespace {
 
-constexpr std::array<std::string_view, wire::kErrorCodes> kRefusalNames{"unknown_operation", "bad_arguments",
-                                                                        "not_property_list", "over_quota"};
-constexpr std::array<std::string_view, kCutReasons> kCutNames{"unreadable_frame", "oversize_frame", "unread_replies",
-                                                              "half_frame",       "stale_frame",    "reset"};
+constexpr std::array<std::string_view, wire::kErrorCodes> kRefusalNames{
+    "unknown_operation", "bad_arguments", "not_property_list", "over_quota", "out_of_memory"};
+constexpr std::array<std::string_view, kCutReasons> kCutNames{
+    "unreadable_frame", "oversize_frame", "unread_replies", "half_frame", "stale_frame", "reset", "out_of_memory"};
 
 plist::Dictionary byReason(std::span<const std::string_view> names, std::span<const std::uint64_t> counts) {
   plist::Dictionary dictionary;

@@ -20,8 +20,9 @@ enum class CutReason : std::uint8_t {
   HalfFrame,        // the client ended inside a frame
   StaleFrame,       // we cut it: the rest of a frame didn't come in time, or too much of such was waiting
   Reset,            // the client went away with replies unread
+  OutOfMemory,      // we cut it: there wasn't even the memory for an error reply
 };
-inline constexpr std::size_t kCutReasons = 6;
+inline constexpr std::size_t kCutReasons = 7;
 
 // What the recorder accounts for; handedOver = committed + waiting + failed.
 struct RecorderCounts {

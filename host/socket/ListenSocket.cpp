@@ -7,8 +7,11 @@
 #include <sys/un.h>
 #include <systemd/sd-daemon.h>
 
+#include <array>
 #include <cerrno>
+#include <cstdio>
 #include <cstring>
+#include <string_view>
 
 #include "host/system/SystemError.h"
 
@@ -36,8 +39,10 @@ Error isTaken(const std::string& path) {
   return {EADDRINUSE, "another service is listening on " + path};
 }
 
+constexpr std::string_view kLockSuffix = ".lock";
+
 std::string lockPathOf(const std::string& path) {
-  return path + ".lock";
+  return path + std::string(kLockSuffix);
 }
 
 // Takes the lock of the path; an error when another service has it.
@@ -102,7 +107,10 @@ void ListenSocket::close() noexcept {
     if (::lstat(name_.c_str(), &file) == 0 && file.st_dev == device_ && file.st_ino == inode_) {
       ::unlink(name_.c_str());
     }
-    ::unlink(lockPathOf(name_).c_str());
+    // Also when there is no memory for a path.
+    std::array<char, sizeof(sockaddr_un) + kLockSuffix.size()> lockPath{};
+    static_cast<void>(std::snprintf(lockPath.data(), lockPath.size(), "%s%s", name_.c_str(), kLockSuffix.data()));
+    ::unlink(lockPath.data());
   }
   socket_.reset();
   lock_.reset();

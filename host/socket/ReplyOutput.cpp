@@ -18,19 +18,29 @@ constexpr std::size_t kKeptBytes = 65536;
 
 }  // namespace
 
-void ReplyOutput::append(std::uint64_t id, std::initializer_list<plist::ValueView> results) {
-  wire::Encoder(bytes_).reply(id, results);
+template <class Encode>
+void ReplyOutput::appendWhole(const Encode& encode) {
+  const std::size_t before = bytes_.size();
+  try {
+    wire::Encoder encoder(bytes_);
+    encode(encoder);
+  } catch (...) {
+    bytes_.resize(before);
+    throw;
+  }
   ++unsentReplies_;
 }
 
-void ReplyOutput::append(const NumbersReply& reply) {
-  wire::Encoder(bytes_).replyWithNumbers(reply.id(), reply.count(), reply.encoded());
-  ++unsentReplies_;
+void ReplyOutput::append(std::uint64_t id, std::initializer_list<plist::ValueView> results) {
+  appendWhole([&](wire::Encoder& encoder) { encoder.reply(id, results); });
+}
+
+void ReplyOutput::append(std::uint64_t id, const NumbersReply& reply) {
+  appendWhole([&](wire::Encoder& encoder) { encoder.replyWithNumbers(id, reply.count(), reply.encoded()); });
 }
 
 void ReplyOutput::append(std::uint64_t id, const platform::RemoteError& error) {
-  wire::Encoder(bytes_).errorReply(id, error.domain, error.code, error.text);
-  ++unsentReplies_;
+  appendWhole([&](wire::Encoder& encoder) { encoder.errorReply(id, error.domain, error.code, error.text); });
 }
 
 void ReplyOutput::countDropped() noexcept {

@@ -26,8 +26,9 @@ class ReplyOutput {
   ReplyOutput(const ReplyOutput&) = delete;
   ReplyOutput& operator=(const ReplyOutput&) = delete;
 
+  // Without the memory for it nothing was appended.
   void append(std::uint64_t id, std::initializer_list<plist::ValueView> results);
-  void append(const NumbersReply& reply);
+  void append(std::uint64_t id, const NumbersReply& reply);
   void append(std::uint64_t id, const platform::RemoteError& error);
   void countDropped() noexcept;
 
@@ -43,6 +44,9 @@ class ReplyOutput {
   bool resetSeen() const noexcept { return resetSeen_; }
 
  private:
+  template <class Encode>
+  void appendWhole(const Encode& encode);
+
   Ledger& ledger_;
   std::string bytes_;
   std::size_t sentBytes_ = 0;

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <array>
+#include <exception>
 #include <type_traits>
 #include <utility>
 
@@ -13,10 +14,20 @@ using platform::TarnReportingServiceProtocol;
 using wire::Operation;
 using wire::Result;
 
-// One request's right to one reply.
+// One request's right to one reply. Work that ends in an exception takes it along: then the request is refused. Work
+// that lets go of it otherwise means that no reply will come.
 class ReplyTicket {
  public:
   ReplyTicket(std::weak_ptr<ReplySink> sink, std::uint64_t id) noexcept : sink_(std::move(sink)), id_(id) {}
+  ReplyTicket(ReplyTicket&& other) noexcept
+      : sink_(std::exchange(other.sink_, {})), id_(other.id_), answered_(other.answered_) {}
+  ReplyTicket& operator=(ReplyTicket&&) = delete;
+  ~ReplyTicket() {
+    if (answered_ || std::uncaught_exceptions() == 0) return;
+    if (const auto sink = sink_.lock()) {
+      sink->refuseForMemory(id_);
+    }
+  }
 
   // Calls `send` with the sink and the ID, or has the error sent; at most once.
   template <class Send>

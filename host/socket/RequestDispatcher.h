@@ -25,6 +25,8 @@ class ReplySink {
   virtual void sendError(std::uint64_t id, const platform::RemoteError& error) = 0;
   // A second reply to one request came; the first went out.
   virtual void dropReply() = 0;
+  // The request's work ended in the middle for want of memory.
+  virtual void refuseForMemory(std::uint64_t id) noexcept = 0;
 };
 
 // Takes the request's arguments out of it. Operations of the service only, not the host's own.

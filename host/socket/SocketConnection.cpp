@@ -5,10 +5,12 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <new>
 
 #include "host/log/LogFloodGuard.h"
 #include "host/log/PrefixedLog.h"
 #include "host/ring/ReceivedDescriptors.h"
+#include "host/system/MemoryReserve.h"
 
 namespace tarn::linux_host {
 
@@ -27,6 +29,11 @@ constexpr std::size_t kEndCost = 24;
 // Numbers of a reply that are encoded at once, and in a unit of cost.
 constexpr std::size_t kNumbersAtOnce = 2048;
 constexpr std::size_t kNumbersPerCost = 128;
+
+// Made without memory: it is short enough for the string itself.
+std::string outOfMemoryText() noexcept {
+  return std::string(wire::kOutOfMemory);
+}
 
 ucred peerOf(const UniqueDescriptor& socket) {
   ucred peer{.pid = 0, .uid = static_cast<uid_t>(-1), .gid = static_cast<gid_t>(-1)};
@@ -63,9 +70,14 @@ void SocketConnection::resume() {
   state_ = State::Open;
   ++host_.ledger.connectionsOpen;
   ++host_.ledger.connectionsTotal;
-  host_.add(*this);
   ++party().connections;
-  watch(EPOLLIN);
+  const bool listens = MemoryReserve::orGiveUp(MemoryReserve::Loss::Connection, [this] {
+    host_.add(*this);
+    watch(EPOLLIN);
+  });
+  if (!listens && state_ == State::Open) {
+    cut(CutReason::OutOfMemory, outOfMemoryText);
+  }
 }
 
 void SocketConnection::refuse(std::string why) {
@@ -76,15 +88,15 @@ void SocketConnection::refuse(std::string why) {
 // Keeps the system's idea of what to wait for in step; asks it only when something changes.
 void SocketConnection::watch(std::uint32_t events) {
   if (events == watchedEvents_) return;
-  const std::uint32_t before = std::exchange(watchedEvents_, events);
   if (events == 0) {
     host_.loop.unwatch(socket_.get());
-  } else if (before != 0) {
+  } else if (watchedEvents_ != 0) {
     host_.loop.change(socket_.get(), events);
-  } else if (host_.loop.watch(socket_.get(), events, shared_from_this()).failed()) {
-    watchedEvents_ = 0;
-    cut(CutReason::Reset, "can't wait for it" + errorSuffix(errno));
+  } else if (const Status watched = host_.loop.watch(socket_.get(), events, shared_from_this()); watched.failed()) {
+    cut(CutReason::Reset, [&] { return "can't wait for it" + errorSuffix(*watched); });
+    return;
   }
+  watchedEvents_ = events;
 }
 
 void SocketConnection::handleEvents(std::uint32_t events) {
@@ -124,7 +136,11 @@ void SocketConnection::stopAtHead(std::uint32_t events) {
 }
 
 bool SocketConnection::receive() {
-  const auto space = frames_.space();
+  std::span<std::byte> space;
+  if (!MemoryReserve::orGiveUp(MemoryReserve::Loss::Connection, [&] { space = frames_.space(); })) {
+    cut(CutReason::OutOfMemory, outOfMemoryText);
+    return false;
+  }
   const auto size = std::min(space.size(), host_.limits.gulpBytes);
   const ssize_t bytes = receiveWithDescriptors(socket_.get(), space.first(size), descriptors_);
   if (bytes > 0) {
@@ -155,7 +171,11 @@ ShareHolder::Turn SocketConnection::takeTurn(std::int64_t credit) {
   }
   countSessions();
   if (!more) {
-    countWaitingBytes(state_ == State::Open ? frames_.pendingBytes() : 0);
+    const std::size_t half = state_ == State::Open ? frames_.pendingBytes() : 0;
+    if (!MemoryReserve::orGiveUp(MemoryReserve::Loss::Connection, [&] { countWaitingBytes(half); })) {
+      cut(CutReason::OutOfMemory, outOfMemoryText);
+      more = true;
+    }
   }
   return {lane_.spent(), more};
 }
@@ -177,20 +197,25 @@ void SocketConnection::countWaitingBytes(std::size_t half) {
 }
 
 void SocketConnection::endHalfFrame(const std::string& why) {
-  cut(CutReason::StaleFrame, why);
+  cut(CutReason::StaleFrame, [&] { return why; });
 }
 
 void SocketConnection::finishWork() {
   const LogClientScope scope(client_);
   while (!lane_.empty()) {
     lane_.beginTurn(FairShares::kQuantum);
-    host_.loop.queue()->runLane(lane_);
+    runLane();
   }
+}
+
+// A piece that fails has taken its request's reply along, which refused it.
+void SocketConnection::runLane() {
+  MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, [this] { host_.loop.queue()->runLane(lane_); });
 }
 
 bool SocketConnection::serveNext() {
   if (!lane_.empty()) {
-    host_.loop.queue()->runLane(lane_);
+    runLane();
     return true;
   }
   if (state_ != State::Open) return false;
@@ -217,8 +242,10 @@ bool SocketConnection::serveNextFrame() {
       }
       return false;
     case wire::FrameBuffer::Next::Oversize:
-      cut(CutReason::OversizeFrame, "frame of " + std::to_string(frames_.announcedBytes()) + " bytes, " +
-                                        std::to_string(host_.limits.maxFrameBytes) + " are allowed");
+      cut(CutReason::OversizeFrame, [this] {
+        return "frame of " + std::to_string(frames_.announcedBytes()) + " bytes, " +
+               std::to_string(host_.limits.maxFrameBytes) + " are allowed";
+      });
       return true;
   }
   return false;
@@ -228,19 +255,23 @@ void SocketConnection::serveFrame(std::span<const std::byte> frame) {
   ++host_.ledger.framesReceived;
   framesTaken_ = true;
   wire::DecodedRequest& request = host_.request;
-  switch (host_.decoder.decode(frame, request, host_.refusal)) {
+  switch (decode(frame)) {
     case wire::DecodeVerdict::Ok:
       serveRequest(request, frame.size());
       break;
     case wire::DecodeVerdict::Refused:
       lane_.spend(costOf(request, frame.size()));
-      host_.ledger.countRefusal(host_.refusal.code);
-      sendError(request.id, {wire::kErrorDomain, static_cast<std::int64_t>(host_.refusal.code), host_.refusal.text});
+      refuseRequest(request.id, host_.refusal.code, std::move(host_.refusal.text));
       break;
     case wire::DecodeVerdict::Unreadable:
-      cut(CutReason::UnreadableFrame, "unreadable frame: " + host_.refusal.text);
+      cut(CutReason::UnreadableFrame, [this] { return "unreadable frame: " + host_.refusal.text; });
       break;
   }
+}
+
+wire::DecodeVerdict SocketConnection::decode(std::span<const std::byte> frame) {
+  const MemoryReserve::Refusable refusable;
+  return host_.decoder.decode(frame, host_.request, host_.refusal);
 }
 
 // The socket then yields what came before and its end, in this order.
@@ -250,13 +281,54 @@ void SocketConnection::endInput() {
   }
 }
 
-template <class... Content>
-void SocketConnection::reply(const Content&... content) {
+template <class Content>
+void SocketConnection::reply(std::uint64_t id, const Content& content) noexcept {
   if ((state_ != State::Open && state_ != State::Ending) || output_.broken()) {
     output_.countDropped();
     return;
   }
-  output_.append(content...);
+  try {
+    output_.append(id, content);
+  } catch (const std::bad_alloc&) {
+    replyShortly(id);
+    return;
+  }
+  flushSoon();
+}
+
+void SocketConnection::refuseRequest(std::uint64_t id, wire::ErrorCode code, std::string why) noexcept {
+  if (code == wire::ErrorCode::OutOfMemory) {
+    MemoryReserve::count(MemoryReserve::Loss::Request);
+  }
+  lane_.spend(1);
+  host_.ledger.countRefusal(code);
+  reply(id, platform::RemoteError{wire::kErrorDomain, static_cast<std::int64_t>(code), std::move(why)});
+}
+
+void SocketConnection::refuseForMemory(std::uint64_t id) noexcept {
+  refuseRequest(id, wire::ErrorCode::OutOfMemory, outOfMemoryText());
+}
+
+// In the place of a reply that is too large for the memory that there is: an error, and without the memory for that the
+// connection's end.
+void SocketConnection::replyShortly(std::uint64_t id) noexcept {
+  const bool appended = MemoryReserve::orGiveUp(MemoryReserve::Loss::Connection, [&] {
+    const platform::RemoteError error{wire::kErrorDomain, static_cast<std::int64_t>(wire::ErrorCode::OutOfMemory),
+                                      outOfMemoryText()};
+    output_.append(id, error);
+  });
+  if (!appended) {
+    output_.countDropped();
+    cut(CutReason::OutOfMemory, outOfMemoryText);
+  } else {
+    MemoryReserve::count(MemoryReserve::Loss::Request);
+    host_.ledger.countRefusal(wire::ErrorCode::OutOfMemory);
+    flushSoon();
+  }
+}
+
+// After a reply was appended.
+void SocketConnection::flushSoon() noexcept {
   const bool waitsForRoom = (watchedEvents_ & EPOLLOUT) != 0;
   if (output_.unsentBytes() > (waitsForRoom ? host_.limits.maxUnreadReplyBytes : kEarlyFlushBytes)) {
     flush();
@@ -275,16 +347,21 @@ void SocketConnection::sendNumbers(std::uint64_t id, std::vector<std::int64_t> n
 }
 
 // In the connection's own line, ahead of its next request.
-void SocketConnection::sendRest(NumbersReply numbers) {
-  numbers.encode(kNumbersAtOnce);
-  if (numbers.whole()) {
-    reply(numbers);
+void SocketConnection::sendRest(NumbersReply numbers) noexcept {
+  const std::uint64_t id = numbers.id();
+  try {
+    numbers.encode(kNumbersAtOnce);
+    if (numbers.whole()) {
+      reply(id, numbers);
+      return;
+    }
+    lane_.spend(kNumbersAtOnce / kNumbersPerCost);
+    host_.loop.queue()->asyncIn(lane_, [this, rest = std::move(numbers)]() mutable { sendRest(std::move(rest)); });
+  } catch (const std::bad_alloc&) {
+    refuseForMemory(id);
     return;
   }
-  lane_.spend(kNumbersAtOnce / kNumbersPerCost);
-  const bool isTurn = WorkLane::currentOf(host_.loop.queue().get()) == &lane_;
-  host_.loop.queue()->asyncIn(lane_, [this, rest = std::move(numbers)]() mutable { sendRest(std::move(rest)); });
-  if (!isTurn) {
+  if (WorkLane::currentOf(host_.loop.queue().get()) != &lane_) {
     host_.shares.ready(self());
   }
 }
@@ -317,7 +394,7 @@ void SocketConnection::flush() {
       output_.breakOff();
     }
   } else if (unsent > host_.limits.maxUnreadReplyBytes) {
-    cut(CutReason::UnreadReplies, std::to_string(unsent) + " bytes of replies left unread");
+    cut(CutReason::UnreadReplies, [&] { return std::to_string(unsent) + " bytes of replies left unread"; });
   } else if (unsent != 0) {
     watch(watchedEvents_ | EPOLLOUT);
   } else {
@@ -328,7 +405,7 @@ void SocketConnection::flush() {
 void SocketConnection::peerEnded(bool reset) {
   const std::size_t half = frames_.pendingBytes();
   if (half != 0) {
-    cut(CutReason::HalfFrame, "ended inside a frame, " + std::to_string(half) + " bytes of it came");
+    cut(CutReason::HalfFrame, [&] { return "ended inside a frame, " + std::to_string(half) + " bytes of it came"; });
     return;
   }
   if (reset) {
@@ -337,10 +414,20 @@ void SocketConnection::peerEnded(bool reset) {
   beginEnd(reset);
 }
 
-void SocketConnection::cut(CutReason reason, const std::string& why) {
+template <class Why>
+void SocketConnection::cut(CutReason reason, const Why& why) noexcept {
+  if (state_ != State::Open) {  // it ends already
+    output_.breakOff();
+    return;
+  }
   host_.ledger.countCut(reason);
-  logPrefixed(host_.log, kConnectionCategory, platform::LogLevel::Error, kModule,
-              "cut off " + description() + ": " + why);
+  const bool told = MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, [&] {
+    logPrefixed(host_.log, kConnectionCategory, platform::LogLevel::Error, kModule,
+                "cut off " + description() + ": " + why());
+  });
+  if (!told) {
+    logPrefixed(host_.log, kConnectionCategory, platform::LogLevel::Error, kModule, description_);
+  }
   beginEnd(true);
 }
 
@@ -379,17 +466,21 @@ void SocketConnection::finish(bool interrupted) {
   --host_.ledger.connectionsOpen;
   host_.remove(*this);
   if (auto handler = std::exchange(interruptionHandler_, {}); handler && interrupted) {
-    handler();
+    MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, handler);
   }
   if (auto handler = std::exchange(invalidationHandler_, {})) {
-    handler();
+    MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, handler);
   }
   object_.reset();
   rings_.reset();
   countSessions();
   --party().connections;
   // After what the handlers left to be done.
-  host_.loop.queue()->asyncIn(lane_, [host = &host_, place = end_] { host->ends.finish(place); });
+  const bool waits = MemoryReserve::orGiveUp(
+      MemoryReserve::Loss::Work, [this] { host_.loop.queue()->asyncIn(lane_, [this] { host_.ends.finish(end_); }); });
+  if (!waits) {
+    host_.ends.finish(end_);
+  }
 }
 
 }  // namespace tarn::linux_host

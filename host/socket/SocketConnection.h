@@ -11,6 +11,11 @@
 // the end was not in order), the invalidation handler and the close, so replies to a client that only half-closed go
 // out. Of a client that is gone altogether, what only asks is dropped.
 //
+// Where memory is missing: receiving and decoding a request may fail and is refused at once, with what the process
+// keeps in reserve left to what was begun before; while the reserve isn't whole, requests are refused but for those
+// that free memory. Work that fails takes its request along, which is refused then. A connection whose error reply
+// finds no memory either is cut off. The end needs none: it is always served.
+//
 // Threads: the main loop's.
 #pragma once
 
@@ -70,6 +75,7 @@ class SocketConnection final : public platform::Connection,
   void sendNumbers(std::uint64_t id, std::vector<std::int64_t> numbers) override;
   void sendError(std::uint64_t id, const platform::RemoteError& error) override;
   void dropReply() override { output_.countDropped(); }
+  void refuseForMemory(std::uint64_t id) noexcept override;
 
   bool takesRingRequests() override { return object_ != nullptr && host_.takesFrom(&party()); }
   void serveRingRequest(wire::DecodedRequest& request) override;
@@ -91,12 +97,18 @@ class SocketConnection final : public platform::Connection,
   bool serveNext();
   bool serveNextFrame();
   void serveFrame(std::span<const std::byte> frame);
-  void serveRequest(wire::DecodedRequest& request, std::size_t frameBytes);
+  wire::DecodeVerdict decode(std::span<const std::byte> frame);
+  // Refuses it where memory is missing before it is handed over.
+  void serveRequest(wire::DecodedRequest& request, std::size_t frameBytes) noexcept;
+  void takeRequest(wire::DecodedRequest& request, std::size_t frameBytes);
+  void handOver(wire::DecodedRequest& request);
+  // The work in the lane.
+  void runLane();
   void hold(wire::DecodedRequest& request, std::size_t frameBytes);
   void settle(std::uint64_t id);
   // Why the request is beyond a quota; empty when it is not.
   std::string quotaRefusal(const wire::Request& request);
-  void refuseRequest(std::uint64_t id, const std::string& why);
+  void refuseRequest(std::uint64_t id, wire::ErrorCode code, std::string why) noexcept;
   // Keeps what is known of the use of quotas in step.
   void countSessions();
   void countWaitingBytes(std::size_t half);
@@ -106,14 +118,18 @@ class SocketConnection final : public platform::Connection,
   void answerRingOperation(std::uint64_t id, plist::ValueView result, const Status& done);
 
   // Sends the reply, or counts it as dropped when nobody can get it any more.
-  template <class... Content>
-  void reply(const Content&... content);
-  void sendRest(NumbersReply numbers);
+  template <class Content>
+  void reply(std::uint64_t id, const Content& content) noexcept;
+  void replyShortly(std::uint64_t id) noexcept;
+  void flushSoon() noexcept;
+  void sendRest(NumbersReply numbers) noexcept;
   // Whether the replies had better go out with those of the next turns.
   bool gathersReplies();
 
   void peerEnded(bool reset);
-  void cut(CutReason reason, const std::string& why);
+  // `why()` is the text that tells the reason.
+  template <class Why>
+  void cut(CutReason reason, const Why& why) noexcept;
   void beginEnd(bool interrupted);
   void finish(bool interrupted);
 
@@ -130,12 +146,13 @@ class SocketConnection final : public platform::Connection,
   wire::FrameBuffer frames_;
   bool inputWaits_ = false;  // the socket may have bytes
   bool peerGone_ = false;    // nobody will read a reply
-  ConnectionEnds::Place end_ = 0;
+  ConnectionEnds::Place end_;
   WorkLane lane_;
   std::vector<UniqueDescriptor> descriptors_;        // that came last, for openRing
   std::shared_ptr<ConnectionRings> rings_;           // once it has any
   std::optional<wire::DecodedRequest> heldRequest_;  // the head request while the gate is shut
   std::size_t heldBytes_ = 0;                        // of its frame
+  bool handedOver_ = false;                          // the request that is served, and its reply with it
   std::string refusal_;                              // the answer to every request; empty: they are served
   QuotaUse use_;
   HalfFrames::Place halfFrame_;

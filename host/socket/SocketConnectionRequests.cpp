@@ -1,8 +1,9 @@
 // The requests of SocketConnection: what is done with one that was decoded, until its work waits in the lane.
-#include <chrono>
+#include <new>
 #include <utility>
 
 #include "host/socket/SocketConnection.h"
+#include "host/system/MemoryReserve.h"
 
 namespace tarn::linux_host {
 
@@ -11,9 +12,28 @@ namespace {
 // Of an answer to `status`, in units of cost.
 constexpr std::size_t kStatusCost = 24;
 
+// What needs memory that it doesn't give back. The rest is served also when there is none to be spared.
+bool takesMemory(wire::Operation operation) {
+  return operation != wire::Operation::StopReportingSessionForID &&
+         operation != wire::Operation::DestroyReportingSession && operation != wire::Operation::Settle &&
+         operation != wire::Operation::KillService;
+}
+
 }  // namespace
 
-void SocketConnection::serveRequest(wire::DecodedRequest& request, std::size_t frameBytes) {
+void SocketConnection::serveRequest(wire::DecodedRequest& request, std::size_t frameBytes) noexcept {
+  const std::uint64_t id = request.id;
+  handedOver_ = false;
+  try {
+    takeRequest(request, frameBytes);
+  } catch (const std::bad_alloc&) {
+    if (!handedOver_) {  // else whoever had the reply has refused it
+      refuseForMemory(id);
+    }
+  }
+}
+
+void SocketConnection::takeRequest(wire::DecodedRequest& request, std::size_t frameBytes) {
   if (peerGone_ && onlyAsks(request.operation)) {
     lane_.spend(1);
     ++host_.ledger.questionsDropped;
@@ -26,7 +46,11 @@ void SocketConnection::serveRequest(wire::DecodedRequest& request, std::size_t f
     return;
   }
   if (!refusal_.empty()) {
-    refuseRequest(request.id, refusal_);
+    refuseRequest(request.id, wire::ErrorCode::OverQuota, refusal_);
+    return;
+  }
+  if (!MemoryReserve::isWhole() && takesMemory(request.operation)) [[unlikely]] {
+    refuseForMemory(request.id);
     return;
   }
   if (request.operation == wire::Operation::OpenRing || request.operation == wire::Operation::DeclareShape) {
@@ -39,24 +63,31 @@ void SocketConnection::serveRequest(wire::DecodedRequest& request, std::size_t f
     return;
   }
   lane_.spend(costOf(request, frameBytes));
-  if (request.operation == wire::Operation::SendMessage) {
-    ++host_.ledger.messagesReceived;
-  }
-  if (const std::string why = quotaRefusal(request); !why.empty()) [[unlikely]] {
-    host_.ledger.messagesOverQuota += request.operation == wire::Operation::SendMessage ? 1 : 0;
-    refuseRequest(request.id, why);
+  const bool isMessage = request.operation == wire::Operation::SendMessage;
+  if (std::string why = quotaRefusal(request); !why.empty()) [[unlikely]] {
+    host_.ledger.messagesReceived += isMessage ? 1 : 0;
+    host_.ledger.messagesOverQuota += isMessage ? 1 : 0;
+    refuseRequest(request.id, wire::ErrorCode::OverQuota, std::move(why));
   } else if (request.operation == wire::Operation::Settle) {
     settle(request.id);
   } else {
-    const WorkLane::Scope scope(&lane_);
-    dispatchRequest(request, *object_, weak_from_this());
+    host_.ledger.messagesReceived += isMessage ? 1 : 0;
+    handOver(request);
   }
+}
+
+// What it takes until it waits in the lane may be refused.
+void SocketConnection::handOver(wire::DecodedRequest& request) {
+  const WorkLane::Scope scope(&lane_);
+  const MemoryReserve::Refusable refusable;
+  handedOver_ = true;
+  dispatchRequest(request, *object_, weak_from_this());
 }
 
 // The request stays here until it can be served. Only one of a connection does, but there may be many connections.
 void SocketConnection::hold(wire::DecodedRequest& request, std::size_t frameBytes) {
-  if (const std::string why = use_.refusalOfWaitingBytes(frameBytes); !why.empty()) {
-    refuseRequest(request.id, why);
+  if (std::string why = use_.refusalOfWaitingBytes(frameBytes); !why.empty()) {
+    refuseRequest(request.id, wire::ErrorCode::OverQuota, std::move(why));
     return;
   }
   heldRequest_ = std::move(request);
@@ -88,12 +119,6 @@ std::string SocketConnection::quotaRefusal(const wire::Request& request) {
   return {};
 }
 
-void SocketConnection::refuseRequest(std::uint64_t id, const std::string& why) {
-  lane_.spend(1);
-  host_.ledger.countRefusal(wire::ErrorCode::OverQuota);
-  sendError(id, {wire::kErrorDomain, static_cast<std::int64_t>(wire::ErrorCode::OverQuota), why});
-}
-
 void SocketConnection::serveRingOperation(const wire::DecodedRequest& request) {
   if (rings_ == nullptr) {
     rings_ = host_.rings.connect(weak_from_this());
@@ -111,8 +136,7 @@ void SocketConnection::answerRingOperation(std::uint64_t id, plist::ValueView re
     sendReply(id, {result});
     return;
   }
-  host_.ledger.countRefusal(wire::ErrorCode::BadArguments);
-  sendError(id, {wire::kErrorDomain, static_cast<std::int64_t>(wire::ErrorCode::BadArguments), done->text});
+  refuseRequest(id, wire::ErrorCode::BadArguments, done->text);
 }
 
 // In the connection's own line, after what it sent over the socket before.

@@ -8,6 +8,7 @@
 #include "host/log/PrefixedLog.h"
 #include "host/socket/Quotas.h"
 #include "host/socket/SocketConnection.h"
+#include "host/system/MemoryReserve.h"
 
 namespace tarn::linux_host {
 
@@ -53,7 +54,10 @@ void SocketListener::handleEvents(std::uint32_t) {
     }
     UniqueDescriptor client(::accept4(socket_.descriptor(), nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
     if (client) {
-      take(std::move(client));
+      MemoryReserve::orGiveUp(MemoryReserve::Loss::Connection, [&] {
+        const MemoryReserve::Refusable refusable;
+        take(std::move(client));
+      });
     } else if (errno == EAGAIN) {
       return;
     } else if (errno != EINTR && errno != ECONNABORTED) {
@@ -64,6 +68,12 @@ void SocketListener::handleEvents(std::uint32_t) {
 }
 
 void SocketListener::pauseAccepting(const std::string& why) {
+  // First what goes on with it: a pause that can't be ended isn't begun.
+  host_.loop.queue()->asyncAfter(kAcceptPause, [weak = weak_from_this()] {
+    if (const auto self = weak.lock()) {
+      self->startAccepting();
+    }
+  });
   if (std::exchange(accepting_, false)) {
     host_.loop.unwatch(socket_.descriptor());
   }
@@ -72,11 +82,6 @@ void SocketListener::pauseAccepting(const std::string& why) {
     logPrefixed(host_.log, kHostCategory, platform::LogLevel::Error, kModule,
                 why + "; clients wait until there is room");
   }
-  host_.loop.queue()->asyncAfter(kAcceptPause, [weak = weak_from_this()] {
-    if (const auto self = weak.lock()) {
-      self->startAccepting();
-    }
-  });
 }
 
 void SocketListener::take(UniqueDescriptor client) {

@@ -3,6 +3,7 @@
 #include <utility>
 
 #include "host/log/PrefixedLog.h"
+#include "host/system/MemoryReserve.h"
 #include "host/traces/TraceThread.h"
 #include "plist/Result.h"
 
@@ -30,7 +31,9 @@ class LinuxPerformanceTraceService::Session final : public platform::Performance
       : thread_(std::move(thread)), recording_(std::move(recording)) {}
   ~Session() override {
     recording_->release();
-    thread_->post(TraceThread::Verb::Release, recording_);
+    // Without the memory to say so, what it wrote stays open until the process ends.
+    MemoryReserve::orGiveUp(MemoryReserve::Loss::Work,
+                            [this] { thread_->post(TraceThread::Verb::Release, recording_); });
   }
   Session(const Session&) = delete;
   Session& operator=(const Session&) = delete;

@@ -5,6 +5,8 @@
 #include <system_error>
 #include <utility>
 
+#include "host/system/MemoryReserve.h"
+
 namespace tarn::linux_host {
 
 bool TraceThread::run() {
@@ -48,10 +50,10 @@ void TraceThread::work() {
     if (ended_) break;
     mutex_.unlock();
     for (const Command& command : commands) {
-      carryOut(command);
+      MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, [&] { carryOut(command); });
     }
     for (const auto& recording : open_) {
-      recording->drain();
+      MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, [&] { recording->drain(); });
     }
     mutex_.lock();
   }

@@ -4,6 +4,17 @@
 
 namespace tarn::recorder {
 
+namespace {
+
+constexpr std::size_t kUsualNameBytes = 64;
+
+}  // namespace
+
+void EventBatch::reserve(std::size_t events) {
+  events_.reserve(events);
+  names_.reserve(events * kUsualNameBytes);
+}
+
 std::size_t EventBatch::add(std::string_view backend, std::string_view name, plist::Dictionary payload,
                             plist::Dictionary detail, double time) {
   std::size_t bytes = sizeof(Event) + name.size();
@@ -13,8 +24,14 @@ std::size_t EventBatch::add(std::string_view backend, std::string_view name, pli
   if (!detail.empty()) {
     bytes += detail.storageBytes();
   }
-  events_.push_back(Event{backend, time, names_.size(), name.size(), bytes, std::move(payload), std::move(detail)});
+  const std::size_t nameAt = names_.size();
   names_.append(name);
+  try {
+    events_.push_back(Event{backend, time, nameAt, name.size(), bytes, std::move(payload), std::move(detail)});
+  } catch (...) {
+    names_.resize(nameAt);
+    throw;
+  }
   bytes_ += bytes;
   return bytes;
 }

@@ -26,7 +26,10 @@ class EventBatch {
     plist::Dictionary detail;
   };
 
+  // Takes the memory for so many events beforehand; what isn't used of it is never touched.
+  void reserve(std::size_t events);
   // Adds an event; returns the bytes that it is counted for. A payload shared with the event before costs nothing more.
+  // Without the memory for it nothing has changed.
   std::size_t add(std::string_view backend, std::string_view name, plist::Dictionary payload, plist::Dictionary detail,
                   double time);
   void clear() noexcept;

@@ -23,4 +23,8 @@ Remedy remedyFor(std::int64_t code) noexcept {
   }
 }
 
+bool isShortage(std::int64_t code) noexcept {
+  return (code & 0xFF) == SQLITE_NOMEM;
+}
+
 }  // namespace tarn::recorder

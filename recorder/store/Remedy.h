@@ -14,5 +14,7 @@ enum class Remedy : std::uint8_t {
 };
 
 Remedy remedyFor(std::int64_t code) noexcept;
+// Whether it failed for want of memory.
+bool isShortage(std::int64_t code) noexcept;
 
 }  // namespace tarn::recorder

@@ -99,6 +99,10 @@ void logWrite(const platform::LogCategory& category, LogLevel level, std::string
   TarnReportingFacilities().log.write({category, level, module, text.line, line});
 }
 
+void logShortage(const platform::LogCategory& category, LogLevel level, std::string_view module, int line) noexcept {
+  TarnReportingFacilities().log.write({category, level, module, line, platform::kNoMemoryForLine});
+}
+
 }  // namespace detail
 
 const platform::LogCategory& TarnReportingClientCategory() {

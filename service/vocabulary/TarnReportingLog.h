@@ -10,13 +10,15 @@
 // text form. "%%" is one percent sign. An argument may be a callable: it is called only when the line is written, so a
 // dear description costs nothing while its level is off.
 //
-// A disabled level costs one branch and formats nothing. Threads: any.
+// A disabled level costs one branch and formats nothing. Nothing is thrown: where memory is missing for the line, a
+// short one stands in its place. Threads: any.
 #pragma once
 
 #include <concepts>
 #include <cstddef>
 #include <cstdint>
 #include <initializer_list>
+#include <new>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -56,6 +58,7 @@ inline bool logEnabled(LogLevel level) noexcept {
 }
 void logWrite(const platform::LogCategory& category, LogLevel level, std::string_view module, const LogText& text,
               std::initializer_list<LogArgument> arguments);
+void logShortage(const platform::LogCategory& category, LogLevel level, std::string_view module, int line) noexcept;
 
 // What an argument is turned into before it is looked at: a callable into its result, everything else into itself.
 template <class Argument>
@@ -73,7 +76,11 @@ template <class... Arguments>
 void TarnReportingLog(const platform::LogCategory& category, LogLevel level, std::string_view module,
                       const LogText& text, const Arguments&... arguments) {
   if (detail::logEnabled(level)) [[unlikely]] {
-    detail::logWrite(category, level, module, text, {LogArgument(detail::logValue(arguments))...});
+    try {
+      detail::logWrite(category, level, module, text, {LogArgument(detail::logValue(arguments))...});
+    } catch (const std::bad_alloc&) {
+      detail::logShortage(category, level, module, text.line);
+    }
   }
 }
 

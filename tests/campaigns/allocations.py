@@ -1,5 +1,9 @@
-"""One allocation after the other fails while a client plays a scenario. The service may refuse that client's request or
-close its connection; it lives, another client beside it is served, and that one's messages are in the store once.
+"""One allocation after the other fails while a client plays a scenario: alone, fifty in a row, and more than the
+service keeps in reserve. So do those of a start and of an end.
+
+The service may refuse that client's requests or close its connection. It lives, leaves nothing of that client behind,
+serves another client, whose messages are in the store once, accounts for every message, and ends in order. A start may
+fail, with a line and a status.
 """
 
 import time
@@ -14,6 +18,13 @@ POLITE = 1
 PATIENCE = 10
 # Beyond what a scenario allocated when it was counted: the recorder's thread allocates when it pleases.
 MARGIN = 3
+# How many fail in a row. Every ordinal fails alone; of the others, which take longer, one in so many is tried.
+IN_A_ROW = {1: 1, 50: 4, 200: 8}
+# Trials after which the service ends in order and is begun anew.
+LIFE = 400
+# The share of trials that are starts and ends, which take a process each.
+ENDS_EACH = 40
+OUTCOMES = ("delivered", "redundant", "unwanted", "undeliverable", "without_session", "refused")
 
 
 class Polite:
@@ -39,6 +50,7 @@ class Trials:
         self.environment = self.control.environment(context.shim("allocations"))
         self.service = context.new_service("", environment=self.environment)
         self.polites = []
+        self.trials = 0
 
     def begin(self):
         """Starts the service when it doesn't run, with a polite client of its own."""
@@ -49,14 +61,22 @@ class Trials:
         if not self.service.start():
             raise RuntimeError(f"the service doesn't start: {self.service.log_text()[-500:]}")
         self.polites.append(Polite(self.service, POLITE + len(self.polites)))
+        self.trials = 0
 
-    def play(self, scenario, failing):
-        """Plays with that allocation failing (COUNT_ONLY: none); the allocations that were made."""
+    def let_fail(self, ordinal, in_a_row=1):
+        self.control[control.ALLOCATIONS] = 0
+        self.control[control.FAILURES_IN_A_ROW] = in_a_row
+        self.control[control.FAILING_ALLOCATION] = ordinal
+
+    def let_work(self):
+        self.control[control.FAILING_ALLOCATION] = 0
+
+    def play(self, scenario, failing, in_a_row=1):
+        """Plays with these allocations failing (COUNT_ONLY: none). What is wrong, if something is."""
         client = None
         try:
             client = self.service.connect(PATIENCE)
-            self.control[control.ALLOCATIONS] = 0
-            self.control[control.FAILING_ALLOCATION] = failing
+            self.let_fail(failing, in_a_row)
             scenario(client, self.service)
             # What the recorder and the connection's end allocate belongs to it too.
             client.close()
@@ -67,7 +87,7 @@ class Trials:
             if "in time" in str(problem):
                 return f"no reply within {PATIENCE} s"
         finally:
-            self.control[control.FAILING_ALLOCATION] = 0
+            self.let_work()
             if client is not None:
                 client.close()
         return None
@@ -78,23 +98,44 @@ class Trials:
         self.play(scenario, control.COUNT_ONLY)
         return self.control[control.ALLOCATIONS]
 
-    def one(self, scenario, ordinal):
+    def one(self, scenario, ordinal, in_a_row):
         self.begin()
         fired = self.control[control.FIRED]
-        problem = self.play(scenario, ordinal)
+        problem = self.play(scenario, ordinal, in_a_row)
         self.figures["fired"] += self.control[control.FIRED] - fired
-        return problem or self.is_well()
+        problem = problem or self.is_well()
+        self.trials += 1
+        if not problem and self.trials >= LIFE:
+            self.account()
+        return problem
 
     def is_well(self):
         try:
             self.polites[-1].say()
             with self.service.connect(PATIENCE) as fresh:
-                fresh.call(wire.STATUS)
+                return self.what_is_left(fresh)
         except (wire.WireError, wire.Refused, OSError) as problem:
             if self.service.ends_within(2):
                 return self.death()
             self.service.kill()  # the next trial begins anew
             return f"the other client isn't served: {problem}"
+
+    def what_is_left(self, fresh):
+        """What the service still has of a client that is gone; it may take a moment to end it."""
+        deadline = time.monotonic() + PATIENCE
+        while True:
+            status = fresh.call(wire.STATUS)
+            # The polite client and this one; the session for messages without one stays for some seconds.
+            gone = status["connections_open"] == 2 and status["sessions"] <= 2 and status["messages_waiting"] == 0
+            if gone or time.monotonic() > deadline:
+                break
+            time.sleep(0.002)
+        if not gone:
+            return "left behind: " + ", ".join(f"{name} {status[name]}" for name in
+                                               ("connections_open", "sessions", "messages_waiting"))
+        dealt = sum(status["messages_" + outcome] for outcome in OUTCOMES)
+        if dealt != status["messages_received"]:
+            return f"the ledger doesn't close: {dealt} of {status['messages_received']} messages"
         return None
 
     def death(self):
@@ -103,14 +144,20 @@ class Trials:
         return f"the service died with {self.service.process.returncode}: {lines[-1][-200:] if lines else 'no line'}"
 
     def account(self):
-        """The polite client that is connected now must find all it said."""
+        """The polite client that is connected now must find all it said. Ends the service in order."""
         if not self.service.is_running():
             return
         polite = self.polites[-1]
         settled(polite.client)
+        shortage = polite.client.call(wire.STATUS)["out_of_memory"]
+        for name in ("requests_refused", "connections_closed", "work_given_up", "reserve_blocks_used"):
+            self.figures[name] += shortage[name]
         status = self.service.stop()
         if status != 0:
             self.context.fail(f"status {status} at the end")
+        self.look_for_messages(polite)
+
+    def look_for_messages(self, polite):
         reader = self.service.reader()
         rows = [(client, number) for _, client, number in rows_after(reader, 0)]
         reader.close()
@@ -120,22 +167,90 @@ class Trials:
             if keys:
                 self.context.fail(f"the other client's messages: {name} {len(keys)}, the first {keys[:3]}")
 
+    # A start and an end of the service, each with allocations that fail.
+
+    def count_life(self):
+        """Allocations of a start and of an end with a client that has a session."""
+        self.account()
+        self.control.forget()
+        self.let_fail(control.COUNT_ONLY)
+        self.service.start()
+        start = self.control[control.ALLOCATIONS]
+        polite = Polite(self.service, POLITE + len(self.polites))
+        self.polites.append(polite)
+        self.let_fail(control.COUNT_ONLY)
+        self.service.stop()
+        return start, self.control[control.ALLOCATIONS]
+
+    def one_start(self, ordinal, in_a_row):
+        self.account()
+        self.control.forget()
+        self.service.forget_log()
+        self.let_fail(ordinal, in_a_row)
+        ready = self.service.start()
+        self.let_work()
+        self.figures["fired"] += self.control[control.FIRED]
+        if ready:
+            self.polites.append(Polite(self.service, POLITE + len(self.polites)))
+            problem = self.is_well()
+            self.account()  # what the runtime couldn't set up is missed later, and belongs to this trial
+            return problem
+        status = self.service.process.returncode
+        if status <= 0 or not self.service.log_text().strip():
+            return f"status {status} and {self.service.log_text()[-200:]!r}"
+        return None
+
+    def one_end(self, ordinal, in_a_row):
+        self.begin()
+        polite = self.polites[-1]
+        polite.say()
+        settled(polite.client)
+        fired = self.control[control.FIRED]
+        self.let_fail(ordinal, in_a_row)
+        status = self.service.stop()
+        self.figures["fired"] += self.control[control.FIRED] - fired
+        self.let_work()
+        if status != 0:
+            return f"status {status}: {self.service.log_text()[-200:]!r}"
+        self.look_for_messages(polite)
+        return None
+
+
+def all_trials(context, trials):
+    """(name, function, arguments) of each: every ordinal of every scenario, and beside them starts and ends."""
+    scenes, lives = [], []
+    counts = {scenario: trials.count(scenario) + MARGIN for scenario in SCENARIOS}
+    start, end = trials.count_life()
+    for many, step in IN_A_ROW.items():
+        first = context.random.randint(1, step)
+        for scenario, count in counts.items():
+            scenes += [(scenario.__name__, trials.one, (scenario, ordinal, many))
+                       for ordinal in range(first, count + 1, step)]
+        lives += [("start", trials.one_start, (ordinal, many)) for ordinal in range(first, start + 1, step)]
+        lives += [("end", trials.one_end, (ordinal, many)) for ordinal in range(first, end + 1, step)]
+    context.random.shuffle(scenes)
+    context.random.shuffle(lives)
+    mixed = []
+    while scenes or lives:
+        mixed += scenes[-ENDS_EACH:] + lives[-1:]
+        del scenes[-ENDS_EACH:], lives[-1:]
+    return mixed
+
 
 def run(context, figures):
-    figures.update(scenarios=len(SCENARIOS), tried=0, of=0, fired=0, survived=0, deaths=0, lost=0, doubled=0)
+    figures.update(scenarios=len(SCENARIOS) + 2, tried=0, of=0, fired=0, survived=0, deaths=0, lost=0, doubled=0,
+                   requests_refused=0, connections_closed=0, work_given_up=0, reserve_blocks_used=0)
     trials = Trials(context, figures)
-    ordinals = []
-    for scenario in SCENARIOS:
-        ordinals += [(scenario, ordinal) for ordinal in range(1, trials.count(scenario) + MARGIN + 1)]
-    figures["of"] = len(ordinals)
-    context.random.shuffle(ordinals)
-    for scenario, ordinal in ordinals:
+    planned = all_trials(context, trials)
+    figures["of"] = len(planned)
+    for name, trial, arguments in planned:
         if context.left() <= 0:
             break
-        problem = trials.one(scenario, ordinal)
+        problem = trial(*arguments)
         figures["tried"] += 1
         if problem:
-            context.fail(f"allocation {ordinal} of {scenario.__name__}: {problem}")
+            ordinal, many = arguments[-2:]
+            context.fail(f"allocation {ordinal} of {name}, {many} in a row: {problem}")
         else:
             figures["survived"] += 1
     trials.account()

@@ -29,7 +29,7 @@ CAMPAIGNS = {
     "kills": ("kills", "SIGKILL at random moments under load: committed, settled and older messages are there, once"),
     "stalls": ("stalls", "synchronisations that take half a second, then SIGKILL: only what came in meanwhile is lost"),
     "syscalls": ("syscalls", "each system call of store, start and socket fails once or is short: the account closes"),
-    "allocations": ("allocations", "each allocation of twenty scenarios fails once: the service lives and serves"),
+    "allocations": ("allocations", "each allocation of scenarios, a start, an end fails: the service lives, serves"),
     "bits": ("bits", "flipped bits, cut, zeroed and swapped pages of every file: seen or harmless"),
     "powercut": ("powercut", "writes that weren't synchronised are dropped: what was committed is there, once"),
     "clock": ("clocksteps", "the wall clock steps by days and years, across restarts: no row is removed"),

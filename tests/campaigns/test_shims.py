@@ -77,6 +77,22 @@ class Shims(unittest.TestCase):
         self.run_with("allocations", "print('alive')")
         self.assertEqual(self.page[control.FIRED], 1)
 
+    def test_fail_several_allocations_in_a_row(self):
+        # The program asks for them itself, once it has all that the interpreter needs for that.
+        text = "import ctypes, mmap, os, struct\n" \
+               "malloc = ctypes.CDLL(None).malloc; malloc.restype = ctypes.c_void_p\n" \
+               "page = mmap.mmap(os.open(os.environ['TARN_SHIM_CONTROL'], os.O_RDWR), 512)\n" \
+               "got = [0] * 6; places = range(6)\n" \
+               "for again in range(2):\n" \
+               f"  struct.pack_into('<Q', page, 8 * {control.ALLOCATIONS}, 0)\n" \
+               f"  struct.pack_into('<Q', page, 8 * {control.FAILURES_IN_A_ROW}, 3)\n" \
+               f"  struct.pack_into('<Q', page, 8 * {control.FAILING_ALLOCATION}, 2)\n" \
+               "  for n in places: got[n] = malloc(8)\n" \
+               f"  struct.pack_into('<Q', page, 8 * {control.FAILING_ALLOCATION}, 0)\n" \
+               "print(*[0 if one is None else 1 for one in got])"
+        self.assertEqual(self.run_with("allocations", text), ["1", "0", "0", "0", "1", "1"])
+        self.assertEqual(self.page[control.FIRED], 6)
+
     def test_move_the_wall_clock_alone(self):
         self.page[control.CLOCK_OFFSET] = int(-366 * 86400 * 1e9)
         wall, steady = map(float, self.run_with("clock", "import time; print(time.time(), time.monotonic())"))

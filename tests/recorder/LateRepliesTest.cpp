@@ -73,6 +73,21 @@ TEST_F(LateRepliesTest, WhatWaitsComesThoughTheirOwnerIsGone) {
   EXPECT_EQ(replies_, (std::vector<int>{1}));
 }
 
+TEST_F(LateRepliesTest, WhatFailsWhenAReplyIsTakenTakesItBack) {
+  LateReplies late(queues_, {"replies"});
+  EXPECT_THROW(static_cast<void>(late.add(reply(1), [] { throw std::bad_alloc(); })), std::bad_alloc);
+  EXPECT_TRUE(late.add(reply(2)));
+  queues_.runUntilIdle();
+  EXPECT_EQ(replies_, (std::vector<int>{2}));
+}
+
+TEST_F(LateRepliesTest, AReplyThatRunsOutOfMemoryDoesNotHoldUpTheEnd) {
+  LateReplies late(queues_, {"replies"});
+  EXPECT_TRUE(late.add([] { throw std::bad_alloc(); }));
+  EXPECT_THROW(queues_.runUntilIdle(), std::bad_alloc);
+  late.close();
+}
+
 TEST_F(LateRepliesTest, ClosedTheyDropWhatWaitsAndTakeNoMore) {
   LateReplies late(queues_, {"replies"});
   const auto held = std::make_shared<int>(0);

@@ -63,6 +63,7 @@ TEST(Operation, ErrorDomainAndCodesAreFixed) {
   EXPECT_EQ(static_cast<int>(ErrorCode::BadArguments), 2);
   EXPECT_EQ(static_cast<int>(ErrorCode::NotPropertyList), 3);
   EXPECT_EQ(static_cast<int>(ErrorCode::OverQuota), 4);
+  EXPECT_EQ(static_cast<int>(ErrorCode::OutOfMemory), 5);
 }
 
 }  // namespace

@@ -71,8 +71,10 @@ BANS = (
         "std::make_unique or std::make_shared"),
     Ban(r"(?<!operator)(?<!operator )(?<!=)(?<!= )\bdelete\b", ("plist/*", "platform/UniqueFunction.h"),
         "a type that owns"),
-    # The C library stands on the C library: the C++ runtime would end the process where memory runs out.
-    Ban(call("malloc|calloc|realloc|free"), ("plist/*", "bench/*", "clients/c/src/*"), "a container"),
+    # The C library stands on the C library: the C++ runtime would end the process where memory runs out. The reserve is
+    # what stands behind operator new.
+    Ban(call("malloc|calloc|realloc|free"),
+        ("plist/*", "bench/*", "clients/c/src/*", "host/system/MemoryReserve.cpp"), "a container"),
     Ban(r"\bstd::(?:thread|async|jthread)\b(?!::id)", (*HOST, *TRIALS, "testing/*"), "platform::WorkQueues"),
     Ban(r"\b(?:(?:const|mutable|static)\s+)*std::(?:(?:recursive_)?mutex|lock_guard|unique_lock|scoped_lock)\b",
         UNCHECKED_LOCKS, "Mutex and MutexLock of plist/ThreadSafety.h, whose use clang checks"),

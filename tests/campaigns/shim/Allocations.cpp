@@ -1,4 +1,5 @@
-// Allocations: lets one allocation of a running program fail, by its number since the campaign began to count.
+// Allocations: lets allocations of a running program fail, one or several in a row, by their number since the campaign
+// began to count.
 #include <cerrno>
 #include <cstddef>
 #include <cstdint>
@@ -21,7 +22,10 @@ bool fails() noexcept {
   Words* const words = controlWords();
   if (words == nullptr) return false;
   const std::uint64_t failing = word(words, Word::FailingAllocation).load();
-  if (failing == 0 || word(words, Word::Allocations).fetch_add(1) + 1 != failing) return false;
+  if (failing == 0) return false;
+  const std::uint64_t ordinal = word(words, Word::Allocations).fetch_add(1) + 1;
+  const std::uint64_t inARow = word(words, Word::FailuresInARow).load();
+  if (ordinal < failing || ordinal - failing >= (inARow == 0 ? 1 : inARow)) return false;
   word(words, Word::Fired).fetch_add(1);
   errno = ENOMEM;
   return true;

@@ -9,6 +9,7 @@
 #include <thread>
 #include <vector>
 
+#include "host/system/MemoryReserve.h"
 #include "tests/host/Eventually.h"
 #include "tests/host/loop/RunningLoop.h"
 
@@ -375,16 +376,33 @@ TEST_F(LinuxWorkQueuesTest, TheEndRunsWhatIsReady) {
   EXPECT_EQ(ran, 500);
 }
 
-TEST_F(LinuxWorkQueuesTest, ASystemWithoutThreadsToGiveEndsTheProcess) {
-  const auto askForOne = [this] {
+TEST_F(LinuxWorkQueuesTest, WorkWaitsUntilTheSystemHasAThreadToGive) {
+  pthread_attr_t usual;
+  ::pthread_getattr_default_np(&usual);
+  {
     // No address space holds stacks of this size.
     pthread_attr_t attributes;
     ::pthread_attr_init(&attributes);
     ::pthread_attr_setstacksize(&attributes, std::size_t{1} << 60U);
     ::pthread_setattr_default_np(&attributes);
-    static_cast<void>(make());
-  };
-  EXPECT_DEATH(askForOne(), "thread constructor failed");
+    EXPECT_FALSE(queues_.start());
+  }
+  const auto queue = make();
+  std::promise<void> ran;
+  queue->async([&ran] { ran.set_value(); });
+  EXPECT_EQ(queues_.unfinished(), 1u);
+  ::pthread_setattr_default_np(&usual);
+  EXPECT_TRUE(queues_.start());
+  ran.get_future().get();
+}
+
+TEST_F(LinuxWorkQueuesTest, APieceThatRunsOutOfMemoryIsGivenUpAndTheNextRuns) {
+  const auto before = MemoryReserve::counts();
+  const auto queue = make();
+  queue->async([] { throw std::bad_alloc(); });
+  finish(*queue);
+  EXPECT_TRUE(queues_.settle(10s));
+  EXPECT_EQ(MemoryReserve::counts().of(MemoryReserve::Loss::Work), before.of(MemoryReserve::Loss::Work) + 1);
 }
 
 }  // namespace

@@ -81,6 +81,28 @@ TEST_F(MainLoopTest, FlushesOnceATurn) {
   EXPECT_EQ(counter_->flushes, 1);
 }
 
+TEST_F(MainLoopTest, WhatRunsOutOfMemoryEndsAloneAndTheLoopGoesOn) {
+  struct Failing : EventHandler {
+    void handleEvents(std::uint32_t) override { throw std::bad_alloc(); }
+    void flush() override { throw std::bad_alloc(); }
+  };
+  const auto failing = std::make_shared<Failing>();
+  bool hookFailed = false;
+  running_.loop.addTurnHook([&] {
+    if (!std::exchange(hookFailed, true)) throw std::bad_alloc();
+  });
+  ASSERT_TRUE(running_.loop.watch(ours_.get(), EPOLLIN | EPOLLET, failing).ok());
+  sendByte();
+  running_.start();
+  running_.onQueue([&] {
+    running_.loop.flushLater(failing);
+    running_.loop.flushLater(counter_);
+  });
+  EXPECT_TRUE(eventually([&] { return counter_->flushes == 1; }));
+  running_.onQueue([&] { running_.loop.unwatch(ours_.get()); });
+  EXPECT_TRUE(hookFailed);
+}
+
 TEST_F(MainLoopTest, FlushesWhatIsReadyWhenItIsStopped) {
   running_.start();
   running_.onQueue([&] {

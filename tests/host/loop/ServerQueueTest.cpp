@@ -5,6 +5,7 @@
 
 #include <string>
 
+#include "host/system/MemoryReserve.h"
 #include "testing/ManualClock.h"
 
 namespace tarn::linux_host {
@@ -46,6 +47,16 @@ TEST_F(ServerQueueTest, RunsWorkHandedOverByWorkBehindWhatWaits) {
   queue_.async(note('b'));
   queue_.run(kAll);
   EXPECT_EQ(ran_, "abc");
+}
+
+TEST_F(ServerQueueTest, APieceThatRunsOutOfMemoryIsGivenUpAndTheNextRuns) {
+  const auto before = MemoryReserve::counts();
+  queue_.async(note('a'));
+  queue_.async([] { throw std::bad_alloc(); });
+  queue_.async(note('b'));
+  EXPECT_EQ(queue_.run(kAll), 3u);
+  EXPECT_EQ(ran_, "ab");
+  EXPECT_EQ(MemoryReserve::counts().of(MemoryReserve::Loss::Work), before.of(MemoryReserve::Loss::Work) + 1);
 }
 
 TEST_F(ServerQueueTest, RunsNoMoreThanTheLimitAndKeepsTheRest) {

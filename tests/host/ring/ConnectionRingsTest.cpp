@@ -98,6 +98,21 @@ TEST_F(ConnectionRingsTest, RecordsThatCannotBeServedAreCountedByReasonAndGoneOn
   EXPECT_EQ(seen(ring.header()->last_refusal), static_cast<std::uint64_t>(TARNRING_BAD_VALUES));
 }
 
+TEST_F(ConnectionRingsTest, AMessageThatThereIsNoMemoryToServeIsRefusedAndTheNextOneServed) {
+  start();
+  ClientRing ring;
+  ASSERT_EQ(open(ring).error.text(), "");
+  ASSERT_EQ(declare(5), "");
+  owner_->hasNoMemory = true;
+  ring.message(5, {1});
+  ASSERT_TRUE(eventually([&] { return refused(TARNRING_OUT_OF_MEMORY) == 1; }));
+  owner_->hasNoMemory = false;
+  ring.message(5, {2});
+  EXPECT_TRUE(eventuallyServed(1));
+  EXPECT_EQ(numbers(), std::vector<std::int64_t>{2});
+  EXPECT_EQ(seen(ring.header()->last_refusal), static_cast<std::uint64_t>(TARNRING_OUT_OF_MEMORY));
+}
+
 TEST_F(ConnectionRingsTest, AMessageWaitsForItsShape) {
   start();
   ClientRing ring;

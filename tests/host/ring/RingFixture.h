@@ -5,6 +5,7 @@
 
 #include <atomic>
 #include <memory>
+#include <new>
 #include <string>
 #include <vector>
 
@@ -22,6 +23,7 @@ class NotingOwner : public linux_host::RingOwner {
   explicit NotingOwner(linux_host::MainLoop& loop) : loop_(loop) {}
   bool takesRingRequests() override { return takes; }
   void serveRingRequest(wire::DecodedRequest& request) override {
+    if (hasNoMemory) throw std::bad_alloc();
     requests.push_back(request);
     ++count;
   }
@@ -29,6 +31,7 @@ class NotingOwner : public linux_host::RingOwner {
   std::string description() const override { return "connection 1 of process 2"; }
 
   std::atomic<bool> takes{true};
+  std::atomic<bool> hasNoMemory{false};
   std::atomic<std::size_t> count{0};
   std::vector<wire::DecodedRequest> requests;
 

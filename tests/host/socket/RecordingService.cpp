@@ -102,9 +102,12 @@ class RecordingService::Client final : public platform::TarnReportingServiceProt
   template <class Body>
   void work(std::string event, Body body) {
     service_.mostWaiting = std::max(service_.mostWaiting, service_.queue_->waiting());
+    service_.allocate(Short::HandingOver);
     service_.queue_->async([this, event = std::move(event), body = std::move(body)]() mutable {
       service_.events.push_back(prefix_ + event);
+      service_.allocate(Short::Working);
       body();
+      service_.allocate(Short::AfterTheReply);
     });
   }
   void acknowledged(std::string event, platform::Acknowledge reply) {
@@ -117,12 +120,19 @@ class RecordingService::Client final : public platform::TarnReportingServiceProt
 };
 
 bool RecordingService::listenerShouldAcceptNewConnection(const std::shared_ptr<platform::Connection>& connection) {
+  allocate(Short::Accepting);
   const int number = ++clients_;
   processIdentifiers.push_back(connection->processIdentifier());
   descriptions.push_back(connection->description());
   connection->setExportedObject(std::make_shared<Client>(*this, number));
-  connection->setInterruptionHandler([this, number] { events.push_back(std::to_string(number) + " interrupted"); });
-  connection->setInvalidationHandler([this, number] { events.push_back(std::to_string(number) + " invalidated"); });
+  connection->setInterruptionHandler([this, number] {
+    events.push_back(std::to_string(number) + " interrupted");
+    allocate(Short::Ending);
+  });
+  connection->setInvalidationHandler([this, number] {
+    events.push_back(std::to_string(number) + " invalidated");
+    allocate(Short::Ending);
+  });
   connection->resume();
   return true;
 }

@@ -5,6 +5,7 @@
 
 #include <functional>
 #include <memory>
+#include <new>
 #include <string>
 #include <vector>
 
@@ -30,6 +31,9 @@ class RecordingService final : public platform::ListenerDelegate,
   std::vector<std::int64_t> reporters{1, -2, 3};  // that getAllReporters answers
   int slices = 0;                    // a stop is so many events "1 slice" first, each of which may give way
   std::function<void(int)> onSlice;  // called with how many are left
+  // Where memory is missing from now on.
+  enum class Short { Nowhere, Accepting, HandingOver, Working, AfterTheReply, Ending };
+  Short shortOfMemory = Short::Nowhere;
 
   // Observations.
   struct Held {
@@ -44,6 +48,9 @@ class RecordingService final : public platform::ListenerDelegate,
 
  private:
   class Client;
+  void allocate(Short where) const {
+    if (shortOfMemory == where) throw std::bad_alloc();
+  }
 
   std::shared_ptr<linux_host::ServerQueue> queue_;
   int clients_ = 0;
