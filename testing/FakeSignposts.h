@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "platform/Signposts.h"
+#include "testing/OwnMemory.h"
 
 namespace tarn::testing {
 
@@ -28,10 +29,12 @@ class FakeSignposts final : public platform::Signposts {
     return std::chrono::nanoseconds(begun_);
   }
   void end(const platform::Signpost& signpost, std::chrono::nanoseconds) noexcept override {
+    const OwnMemory own;
     const std::lock_guard lock(mutex_);
     intervals_.push_back(postOf(signpost));
   }
   void mark(const platform::Signpost& signpost) noexcept override {
+    const OwnMemory own;
     const std::lock_guard lock(mutex_);
     marks_.push_back(postOf(signpost));
   }

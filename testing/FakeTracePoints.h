@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "platform/TracePoints.h"
+#include "testing/OwnMemory.h"
 
 namespace tarn::testing {
 
@@ -21,6 +22,7 @@ class FakeTracePoints final : public platform::TracePoints {
 
   // The interface.
   void emit(std::uint32_t code, std::int64_t argument) noexcept override {
+    const OwnMemory own;
     const std::lock_guard lock(mutex_);
     emitted_.push_back({code, argument});
     if (onEmit_) {

@@ -13,6 +13,7 @@
 #include <utility>
 
 #include "testing/ManualClock.h"
+#include "testing/OwnMemory.h"
 
 namespace tarn::testing {
 
@@ -76,24 +77,19 @@ class ManualSchedule {
   }
 
   bool runOne(Filter filter) {
-    platform::Work work;
-    {
-      const std::lock_guard lock(mutex_);
-      promoteDue();
-      const auto next = std::find_if(ready_.begin(), ready_.end(), [&](const Piece& piece) {
-        return matches(piece, filter) && !suspended_.contains(piece.queue) &&
-               std::find(running_.begin(), running_.end(), piece.queue) == running_.end();
-      });
-      if (next == ready_.end()) return false;
-      work = std::move(next->work);
-      running_.push_back(next->queue);
-      runner_ = std::this_thread::get_id();
-      ready_.erase(next);
-    }
+    platform::Work work = takeNext(filter);
+    if (!work) return false;
+    // Also when the work throws, whose queue goes on with the next piece then.
+    struct Running {
+      ManualSchedule& schedule;
+      platform::Work& work;
+      ~Running() {
+        work.reset();  // still as work of its queue
+        const std::lock_guard lock(schedule.mutex_);
+        schedule.running_.pop_back();
+      }
+    } const running{*this, work};
     work();
-    work.reset();  // still as work of its queue
-    const std::lock_guard lock(mutex_);
-    running_.pop_back();
     return true;
   }
   std::size_t runUntilIdle(Filter filter) {
@@ -145,12 +141,29 @@ class ManualSchedule {
   };
   using Suspensions = std::map<std::size_t, Suspension>;
 
+  // The oldest piece of due work that can run, which counts as running from now on; empty when there is none.
+  platform::Work takeNext(Filter filter) {
+    const OwnMemory own;
+    const std::lock_guard lock(mutex_);
+    promoteDue();
+    const auto next = std::find_if(ready_.begin(), ready_.end(), [&](const Piece& piece) {
+      return matches(piece, filter) && !suspended_.contains(piece.queue) &&
+             std::find(running_.begin(), running_.end(), piece.queue) == running_.end();
+    });
+    if (next == ready_.end()) return {};
+    platform::Work work = std::move(next->work);
+    running_.push_back(next->queue);
+    runner_ = std::this_thread::get_id();
+    ready_.erase(next);
+    return work;
+  }
   static bool matches(const Piece& piece, Filter filter) { return !filter || piece.queue == *filter; }
   Suspensions::iterator endSuspension(Suspensions::iterator at) {
     ready_.push_front({at->first, std::move(at->second.next)});
     return suspended_.erase(at);
   }
   void promoteDue() {
+    const OwnMemory own;
     const auto now = clock_.monotonic();
     for (auto at = suspended_.begin(); at != suspended_.end();) {
       at = at->second.due <= now ? endSuspension(at) : std::next(at);

@@ -3,6 +3,8 @@
 #include <algorithm>
 #include <utility>
 
+#include "testing/OwnMemory.h"
+
 namespace tarn::testing {
 
 namespace {
@@ -20,6 +22,7 @@ std::string RecordingLog::Entry::message() const {
 }
 
 void RecordingLog::write(const platform::LogEntry& entry) noexcept {
+  const OwnMemory own;
   Entry kept{std::string(entry.category.subsystem),
              std::string(entry.category.code),
              entry.level,
