@@ -80,7 +80,8 @@ class Trials:
             scenario(client, self.service)
             # What the recorder and the connection's end allocate belongs to it too.
             client.close()
-            time.sleep(0.002)
+            if not self.service.comes_to_rest(lambda: self.control[control.ALLOCATIONS], PATIENCE):
+                return f"it doesn't come to rest within {PATIENCE} s"
         except (wire.WireError, wire.Refused, AssertionError, OSError) as problem:
             if failing == control.COUNT_ONLY:
                 raise RuntimeError(f"{scenario.__name__} fails by itself: {problem}") from problem

@@ -12,6 +12,8 @@ import time
 import wire
 
 PATIENCE = 30
+# A writer that waits for company for a commit naps for a millisecond or two, as does whoever waits for memory.
+LONGEST_NAP = 0.006
 PARENT_DEATH_SIGNAL = 1
 LIBC = ctypes.CDLL(None)
 
@@ -92,6 +94,33 @@ class Service:
         try:
             self.process.wait(seconds)
         except subprocess.TimeoutExpired:
+            return False
+        return True
+
+    def comes_to_rest(self, progress, patience=PATIENCE):
+        """Waits until all its threads sleep, longer than any does between two parts of one work. Whether they do, or
+        it ended. What `progress` tells moves on with the work.
+        """
+        deadline = time.monotonic() + patience
+        since, seen = time.monotonic(), None
+        while self.is_running():
+            now, made = time.monotonic(), progress()
+            if not self.sleeps() or made != seen:
+                since, seen = now, made
+            elif now - since >= LONGEST_NAP:
+                return True
+            if now > deadline:
+                return False
+            time.sleep(0.001)
+        return True
+
+    def sleeps(self):
+        try:
+            for thread in os.listdir(f"/proc/{self.process.pid}/task"):
+                with open(f"/proc/{self.process.pid}/task/{thread}/stat", encoding="utf-8", errors="replace") as file:
+                    if file.read().rpartition(")")[2].split()[0] != "S":
+                        return False
+        except (FileNotFoundError, ProcessLookupError):  # it has ended in the meantime
             return False
         return True
 
