@@ -40,7 +40,6 @@ class TarnReportingMessageDelivery {
   platform::Reply<> reply_;
   TarnReportingServiceDelegateProtocol::SessionSearch search_;
   bool found_ = false;    // the search is over
-  bool gaveWay_ = false;  // others' work was done since then
   std::size_t next_ = 0;  // of the sessions that were found
   TarnReportingOutcome outcome_ = TarnReportingOutcome::WithoutSession;
 };

@@ -53,13 +53,6 @@ class TarnReportingSessionMap {
   Session firstRunning() const { return running_.empty() ? nullptr : running_.begin()->second->session; }
   Session first() const { return ordered_.empty() ? nullptr : ordered_.begin()->second.session; }
 
-  // Calls visit(reporterID, session) for each, in order.
-  template <class Visit>
-  void forEach(Visit&& visit) const {
-    for (const auto& [place, entry] : ordered_) {
-      visit(entry.reporterID, entry.session);
-    }
-  }
   // Calls visit(session) for each that runs, in order, while it returns true; whether it always did.
   template <class Visit>
   bool forEachRunning(Visit&& visit) const {

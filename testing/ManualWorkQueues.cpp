@@ -218,6 +218,7 @@ void ManualWorkQueue::help(std::chrono::nanoseconds) {
 
 bool ManualWorkQueue::spend(std::size_t cost) {
   spent_ += cost;
+  spentInAll_ += cost;
   return turn_ != 0 && spent_ >= turn_;
 }
 
