@@ -222,6 +222,12 @@ TEST_F(SliceBounds, ALookUpOfAnUnknownIDHasItsLine) {
   EXPECT_TRUE(platform_.log.contains(LogLevel::Error, "failed to find reporting session 99"));
 }
 
+TEST_F(SliceBounds, ListingSessionsOutsideTheServerQueueEndsTheProcess) {
+  const auto other = platform_.workQueues.makeSerialQueue("other", platform::QualityOfService::Utility);
+  other->async([this] { service_->logReportingSessions(); });
+  EXPECT_DEATH(platform_.runUntilIdle(), "code of the server queue was called outside it");
+}
+
 TEST_F(SliceBounds, AListOfExactlyTheBytesOfACallIsWhole) {
   create(client_, 7);
   start(client_, 7, held_);
