@@ -114,8 +114,8 @@ bool TarnReportingUtilityIsABTestModeOn(AudioEventCategory category);
 bool TarnReportingUtilityShouldSendMessage();
 // A session's ID is its reporter ID.
 std::int64_t TarnReportingUtilityExtractSessionIDFromReporterID(std::int64_t reporterID);
-// Seconds that playback must last to count: 0.5 for every service type. Shorter segments are left out of what the
-// volume, input and lagoon workers derive.
+// Seconds that playback must last to count: 0.5 for every service type. Segments that are no longer than this are left
+// out of what the volume, input and lagoon workers derive.
 double TarnReportingUtilityVolumeMinimumPlayingTime(AudioServiceType serviceType);
 
 }  // namespace tarn
