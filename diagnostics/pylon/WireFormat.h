@@ -24,6 +24,7 @@ enum class WireType : std::uint8_t {
 
 // What 64 bits need at seven a byte.
 inline constexpr std::size_t kLongestVarint = 10;
+// Of a byte of a varint, for the number; and of a tag, for the layout.
 inline constexpr unsigned kVarintBits = 7;
 inline constexpr unsigned kWireTypeBits = 3;
 inline constexpr unsigned kWireTypeMask = (1U << kWireTypeBits) - 1;
