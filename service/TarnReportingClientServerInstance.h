@@ -80,8 +80,8 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
   // two clients use comes twice. The list is made in slices: a session that is there all the while is in it once. The
   // single-message session is no client's and not in it.
   void getAllReporters(platform::Reply<std::vector<std::int64_t>> reply) override;
-  // Ends the process with exit status 2, with no reply, no session stopped and nothing flushed. Any client may ask for
-  // it.
+  // Ends the process with exit status 2, with no reply and no session stopped. What the back-ends hold by then is
+  // theirs to bring to the disk. Any client may ask for it.
   void killService() override;
   // What the connection's quotas look at before they let a request in; see host/socket/Quotas.h. `logBytes` is the
   // estimated memory of the logged messages of all of this client's sessions, those included that were replaced while
