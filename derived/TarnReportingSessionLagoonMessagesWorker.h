@@ -71,6 +71,7 @@ class TarnReportingSessionLagoonMessagesWorker : public TarnReportingSessionWork
   static bool watchedFieldChangeInMessage(const Fields& message, const Fields& previous);
   // Whether both sides hold the value and it differs, read as that type.
   static bool didStringChangeInKey(Field key, const Fields& left, const Fields& right);
+  // Texts by their letters, integers cut toward zero, booleans by whether the value is 0.
   static bool didIntChangeInKey(Field key, const Fields& left, const Fields& right);
   static bool didBoolChangeInKey(Field key, const Fields& left, const Fields& right);
   // The value in the first of the sources that holds it; absent when none does. It looks into that source.

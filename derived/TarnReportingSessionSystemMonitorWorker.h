@@ -35,6 +35,7 @@ class TarnReportingSessionSystemMonitorWorker : public TarnReportingSessionWorke
   TarnReportingSessionSystemMonitorWorker(std::weak_ptr<TarnReportingSession> session,
                                           std::shared_ptr<TarnReportingSystemMonitorDictionary> systemMonitorDictionary,
                                           std::vector<plist::Key> featureKeys);
+  // Stops, so that the monitor's dictionary doesn't keep observers of sessions that are gone.
   ~TarnReportingSessionSystemMonitorWorker() override;
 
   // Sends the settings that are known and observes them all; always true. Reading and observing a setting are one step

@@ -28,6 +28,7 @@ class TarnReportingSessionTattleWorker : public TarnReportingSessionWorkerProtoc
   // The back-off is the default "ParleyInvalidXyBackOffSeconds"; a line at debug level tells when it isn't set.
   static std::unique_ptr<TarnReportingSessionTattleWorker> initWithSession(
       const std::shared_ptr<TarnReportingSession>& session);
+  // Errors of an application that reports without a session count too.
   static bool handleSingleMessageSession() { return true; }
   // `backOffTime`: seconds between two prompts on the device.
   TarnReportingSessionTattleWorker(std::weak_ptr<TarnReportingSession> session, double backOffTime);
@@ -49,6 +50,7 @@ class TarnReportingSessionTattleWorker : public TarnReportingSessionWorkerProtoc
   // The bug report as it is offered: texts, component, and which diagnostics are to be gathered. Always the same.
   static platform::TattleDraft docketDraftForParleyXYerror();
 
+  // As it was set when the worker was made: a later change of the default is for later sessions.
   double backOffTime() const noexcept { return backOffTime_; }
   bool hasRun() const noexcept { return hasRun_; }
   // Epoch seconds by which a message must be later to count; -1 until one has come. A stop keeps it.

@@ -21,6 +21,7 @@ class TarnReportingSessionWattlogWorker : public TarnReportingSessionWorkerProto
  public:
   static constexpr std::string_view kClassName = "TarnReportingSessionWattlogWorker";
 
+  // Nothing where the device has no power log.
   static std::unique_ptr<TarnReportingSessionWattlogWorker> initWithSession(
       const std::shared_ptr<TarnReportingSession>& session);
   static bool startOnInit() { return true; }

@@ -38,6 +38,7 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
       std::int32_t processIdentifier, std::weak_ptr<TarnReportingServiceDelegateProtocol> delegate);
   TarnReportingClientServerInstance(const TarnReportingClientServerInstance&) = delete;
   TarnReportingClientServerInstance& operator=(const TarnReportingClientServerInstance&) = delete;
+  // Logs a line with the client's process; its sessions go with the map, in order.
   ~TarnReportingClientServerInstance() override;
 
   // Makes a session of no type, not started, whose only process is this client. One under the same ID is dropped
@@ -88,6 +89,7 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
   // somebody still holds them.
   std::size_t sessionCount() const override { return sessions_.size(); }
   std::size_t logBytes() const override { return logAccount_->bytes; }
+  // Whether a further create under this ID would replace a session, and so needs no room for one more.
   bool hasSession(std::int64_t reporterID) const override { return sessions_.find(reporterID) != nullptr; }
 
   // Ends the client: on the server queue, stops its started sessions, drops all of them and leaves the service's list.

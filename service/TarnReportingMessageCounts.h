@@ -27,6 +27,7 @@ struct TarnReportingMessageCounts {
   // By the number of the outcome.
   std::array<std::uint64_t, 6> counts{};
 
+  // One message more with this outcome, and how many there were.
   void add(TarnReportingOutcome outcome) noexcept { ++counts[static_cast<std::size_t>(outcome)]; }
   std::uint64_t of(TarnReportingOutcome outcome) const noexcept { return counts[static_cast<std::size_t>(outcome)]; }
 };

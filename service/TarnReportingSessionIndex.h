@@ -43,6 +43,7 @@ class TarnReportingSessionIndex {
   const Clients& clients() const noexcept { return clients_; }
   // Of all clients together, without the single-message session, which is no client's.
   std::size_t sessionCount() const noexcept { return sessionCount_; }
+  // Those of them that are started.
   std::size_t runningCount() const noexcept { return running_; }
 
  private:

@@ -57,6 +57,7 @@ class TarnReportingSessionMap {
   // Notes that the session under this ID was started or stopped. Nothing happens when there is none, or when that is
   // known already.
   void setRunning(std::int64_t reporterID, bool running);
+  // All of them, started or not.
   std::size_t size() const noexcept { return ordered_.size(); }
   // How many of them run.
   std::size_t runningCount() const noexcept { return running_.size(); }

@@ -38,6 +38,7 @@ class TarnReportingSession : public std::enable_shared_from_this<TarnReportingSe
   // Before the first session is made. The lists that sessions go by are derived when the first one is made. A later
   // call replaces both, for sessions that are made or started from then on.
   static void setAllWorkerClasses(std::span<const TarnReportingSessionWorkerClass> table);
+  // The table that was handed over; empty before.
   static std::span<const TarnReportingSessionWorkerClass> getAllWorkerClasses();
 
   // A session with its start-on-creation workers running. It has no service type (65535), no configuration and no name
@@ -108,8 +109,11 @@ class TarnReportingSession : public std::enable_shared_from_this<TarnReportingSe
 
   // From start() to the end of stop(): producers that stop still find it true.
   bool started() const noexcept { return started_; }
+  // Set at creation, for good.
   bool isSingleMessageSession() const noexcept { return mode_ == Mode::SingleMessage; }
+  // The client's own choice; two clients may have the same.
   std::int64_t reporterID() const noexcept { return reporterID_; }
+  // Unknown until it is set. Workers ask for it when they need it; what was made under an earlier type stays.
   AudioServiceType serviceType() const noexcept { return serviceType_; }
   // That of the service type. The text is static.
   std::string_view serviceName() const noexcept { return serviceName_; }
@@ -117,6 +121,7 @@ class TarnReportingSession : public std::enable_shared_from_this<TarnReportingSe
   const plist::Dictionary& configuration() const noexcept { return configuration_; }
   // Empty when it is not known.
   const std::string& clientProcessName() const noexcept { return clientProcessName_; }
+  // The owner's first; fixed at creation.
   const std::vector<std::int32_t>& processIdentifiers() const noexcept { return processIdentifiers_; }
   // The log: what came and was not redundant since start, and the markers of start and stop. In the order of arrival;
   // when the workers' stop begins, in the order of time.

@@ -73,9 +73,11 @@ class TarnReportingSessionLogMemory {
   std::size_t costOf(const TarnReportingSessionMessage& record) noexcept;
   // Books them with the process, the list and its owner's account, and moves the list to another row when it is time.
   void add(List& list, std::size_t bytes);
+  // The opposite. While the store fails it also brings the next attempt nearer, as there is less in memory.
   void subtract(List& list, std::size_t bytes) noexcept;
   // Moves messages to the store until both bounds are kept again, or it takes no more.
   void relieve(List& list);
+  // Moves a chunk of the largest list that can give one; false when none can or the store failed.
   bool relieveLargest();
   // Pages count that the store had no room for.
   std::size_t bytesInMemory() const noexcept { return bytes_ + pageCounts_->bytesInMemory; }
@@ -83,6 +85,7 @@ class TarnReportingSessionLogMemory {
   bool mayTry() const noexcept { return store_ != nullptr && bytesInMemory() >= retryAt_; }
   // An error line for the first of failures in a row, and one more line when the store takes messages again.
   void toldFailure(const Error& error);
+  // From then on it is tried again whenever a bound is exceeded.
   void toldSuccess();
   // Puts the list into the row of its size.
   void place(List& list) noexcept;

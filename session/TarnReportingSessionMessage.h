@@ -39,12 +39,15 @@ class TARN_CAPABILITY TarnReportingSessionMessage {
 
   // The payload; only the session and producers at its stop change that of a record which others hold.
   const plist::Dictionary& message() const noexcept { return message_; }
+  // To be written to, under the record's guard where somebody else may hold the record.
   plist::Dictionary& mutableMessage() noexcept { return message_; }
+  // With the type: what kind of message it is, for good.
   AudioEventCategory category() const noexcept { return category_; }
   AudioEventType type() const noexcept { return type_; }
 
   // Whether the message repeats an earlier one of its session.
   bool isRedundant() const noexcept { return isRedundant_; }
+  // For the session's intake, as the next setter.
   void setIsRedundant(bool redundant) noexcept { isRedundant_ = redundant; }
   // Whether the session was started when the message arrived.
   bool isSessionStarted() const noexcept { return isSessionStarted_; }

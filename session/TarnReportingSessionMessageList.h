@@ -40,6 +40,7 @@ class TarnReportingSessionMessageList {
   TarnReportingSessionMessageList() = default;
   // The log of a session. Its first overflow since it was empty logs a line with this ID, the messages and the bytes.
   explicit TarnReportingSessionMessageList(std::int64_t reporterID) : reporterID_(reporterID) {}
+  // No loop goes on over either.
   TarnReportingSessionMessageList(TarnReportingSessionMessageList&& other) noexcept;
   TarnReportingSessionMessageList& operator=(TarnReportingSessionMessageList&& other) noexcept;
   TarnReportingSessionMessageList(const TarnReportingSessionMessageList&) = delete;
@@ -68,6 +69,7 @@ class TarnReportingSessionMessageList {
   // a page, at random one a record.
   Record operator[](std::size_t index) const;
   Record at(std::size_t index) const { return (*this)[index]; }
+  // Of a list that isn't empty.
   Record front() const { return (*this)[0]; }
   Record back() const { return (*this)[size() - 1]; }
   // Only one pass: an iterator is moved, not copied, and nothing of the list is moved to the store while it lives.
@@ -143,6 +145,7 @@ class TarnReportingSessionMessageList {
   bool isSorted() const;
   // Empties the list into sorted ones, which merge() puts together again.
   std::vector<TarnReportingSessionMessageList> sortedRuns();
+  // As far as the store took the runs, two pages of each are in memory at a time.
   void merge(std::vector<TarnReportingSessionMessageList>& runs);
   void takeFrom(TarnReportingSessionMessageList& other) noexcept;
 

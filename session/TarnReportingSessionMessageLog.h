@@ -24,6 +24,7 @@ class TarnReportingSessionMessageLog {
  public:
   using Record = TarnReportingSessionMessageList::Record;
 
+  // The ID is for lines about the overflow alone.
   explicit TarnReportingSessionMessageLog(std::int64_t reporterID) : messages_(reporterID) {}
 
   void setAccount(std::shared_ptr<TarnReportingSessionLogAccount> account) { messages_.setAccount(std::move(account)); }
@@ -39,6 +40,7 @@ class TarnReportingSessionMessageLog {
   // holds until the next look-up. One hash look-up; a read from the store when the record overflowed and isn't kept.
   const TarnReportingSessionMessage* newest(AudioEventCategory category, AudioEventType type) const;
 
+  // Who changes a record of it in place does so by the list's change().
   const TarnReportingSessionMessageList& messages() const noexcept { return messages_; }
   // In records, the markers of start and stop included.
   std::size_t size() const noexcept { return messages_.size(); }

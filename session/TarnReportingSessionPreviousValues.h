@@ -27,6 +27,7 @@ class TarnReportingSessionPreviousValues {
 
   // The latest value of the key, absent when it was never seen. Ends with the next merge. At most 17 look-ups.
   plist::ValueView get(const plist::Key& key) const noexcept;
+  // How many keys there are; for tests and for looking at a session.
   std::size_t size() const { return dictionary().size(); }
   // All of it. The order of the keys has no meaning. Made anew by each call, in one pass; size() makes it too.
   plist::Dictionary dictionary() const;

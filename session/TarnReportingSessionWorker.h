@@ -41,6 +41,7 @@ class TarnReportingSessionWorkerProtocol {
   void setSession(std::weak_ptr<TarnReportingSession> session) noexcept { session_ = std::move(session); }
   // Whether the worker runs; kept by the session. A worker whose back-end has a say in it keeps it itself.
   virtual bool started() const noexcept { return started_; }
+  // The session sets it to what start() says, and to false when it has stopped the worker.
   virtual void setStarted(bool started) noexcept { started_ = started; }
 
  private:

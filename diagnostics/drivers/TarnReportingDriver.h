@@ -16,6 +16,7 @@ class TarnReportingDriver {
   // Both may be missing, which means every channel.
   static TarnReportingDriver driverWithGroupName(Name groupName, Name subGroupName);
 
+  // Nothing: any group, and any sub-group.
   const Name& groupName() const noexcept { return groupName_; }
   const Name& subGroupName() const noexcept { return subGroupName_; }
   // "%@-%@" of both; a missing one reads "(null)". Snapshots are kept under it.

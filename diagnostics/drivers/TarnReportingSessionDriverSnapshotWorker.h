@@ -22,6 +22,7 @@ class TarnReportingSessionDriverSnapshotWorker : public TarnReportingSessionWork
  public:
   static constexpr std::string_view kClassName = "TarnReportingSessionDriverSnapshotWorker";
 
+  // Nothing where the platform has no report channels.
   static std::unique_ptr<TarnReportingSessionDriverSnapshotWorker> initWithSession(
       const std::shared_ptr<TarnReportingSession>& session);
   using TarnReportingSessionWorkerProtocol::TarnReportingSessionWorkerProtocol;

@@ -46,14 +46,16 @@ class AudioIssueDetected final : public MetricMessage {
   // The timestamp only when it was set.
   void formatText(TextFormatter& formatter, std::string_view name) const override;
 
-  // The kind of issue, as "glitch"; the node of the audio graph on which it was seen; the real-time-audio client that
-  // it concerns.
+  // The kind of issue, as "glitch".
   const std::string& issuetype() const noexcept { return issuetype_; }
   void setIssuetype(std::string bytes) noexcept { issuetype_ = std::move(bytes); }
+  // The node of the audio graph on which it was seen.
   const std::string& node() const noexcept { return node_; }
   void setNode(std::string bytes) noexcept { node_ = std::move(bytes); }
+  // The real-time-audio client that it concerns.
   const std::string& rtaidclient() const noexcept { return rtaidclient_; }
   void setRtaidclient(std::string bytes) noexcept { rtaidclient_ = std::move(bytes); }
+  // A timestamp of 0 that was set is one too.
   bool hasTimestamp() const noexcept { return (has_ & kHasTimestamp) != 0; }
   // 0 unless it was set.
   std::uint64_t timestamp() const noexcept { return hasTimestamp() ? timestamp_ : 0; }

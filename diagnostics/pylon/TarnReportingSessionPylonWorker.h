@@ -20,6 +20,7 @@ class TarnReportingSessionPylonWorker : public TarnReportingSessionWorkerProtoco
  public:
   static constexpr std::string_view kClassName = "TarnReportingSessionPylonWorker";
 
+  // Nothing where the device has no metric service.
   static std::unique_ptr<TarnReportingSessionPylonWorker> initWithSession(
       const std::shared_ptr<TarnReportingSession>& session);
   static bool startOnInit() { return true; }

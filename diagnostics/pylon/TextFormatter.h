@@ -11,12 +11,14 @@ namespace pylonmetrics {
 class TextFormatter {
  public:
   virtual ~TextFormatter() = default;
+  // `name` is that of the record's type.
   virtual void beginObject(std::string_view name) = 0;
   // The name is the field's, without escapes, and needs to last only for the call.
   virtual void formatSigned(std::string_view name, std::int64_t value) = 0;
   virtual void formatUnsigned(std::string_view name, std::uint64_t value) = 0;
   // Any bytes, NUL included.
   virtual void formatString(std::string_view name, std::string_view bytes) = 0;
+  // As many as there were beginnings.
   virtual void endObject() = 0;
 };
 

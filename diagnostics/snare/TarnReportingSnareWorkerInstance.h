@@ -61,6 +61,7 @@ struct TarnReportingSnareWorkerInstanceClass {
   template <std::derived_from<Instance> T>
   static constexpr TarnReportingSnareWorkerInstanceClass of();
 
+  // kClassName: what log lines and shared states call it.
   std::string_view name;
   // Never null in a row that of() made.
   std::unique_ptr<Instance> (*initWithSession)(const std::shared_ptr<TarnReportingSession>&) = nullptr;
@@ -69,6 +70,7 @@ struct TarnReportingSnareWorkerInstanceClass {
   // Called after the message was counted and before the rule is asked; the fire comes after the rule.
   void (*handleMessage)(Instance&, const TarnReportingSessionMessage&) = nullptr;
   void (*fire)(Instance&, const TarnReportingSessionMessage&) = nullptr;
+  // With the worker's own start and stop.
   void (*start)(Instance&) = nullptr;
   void (*stop)(Instance&) = nullptr;
 };

@@ -22,6 +22,7 @@ class TarnReportingSnareWorkerInstanceSSSLeaks : public TarnReportingSnareWorker
   static std::unique_ptr<TarnReportingSnareWorkerInstanceSSSLeaks> initWithSession(
       const std::shared_ptr<TarnReportingSession>& session);
   static bool handleSingleMessageSession() { return true; }
+  // Both states are kept for as long as the instance lives.
   TarnReportingSnareWorkerInstanceSSSLeaks(std::weak_ptr<TarnReportingSession> session,
                                            std::shared_ptr<WorkerInstanceState> workerState,
                                            std::shared_ptr<TarnReportingSnareProcessState> processState);

@@ -36,6 +36,7 @@ class TarnReportingSynchronized {
   TarnReportingSynchronized(const TarnReportingSynchronized&) = delete;
   TarnReportingSynchronized& operator=(const TarnReportingSynchronized&) = delete;
 
+  // A copy; nothing when none was set.
   std::optional<T> get() const {
     const MutexLock guard(mutex_);
     return value_;

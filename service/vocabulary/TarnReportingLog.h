@@ -52,6 +52,7 @@ namespace detail {
 // NOLINTNEXTLINE(cppcoreguidelines-avoid-non-const-global-variables)
 extern const platform::Log* installedLog;
 
+// False while no log is installed.
 inline bool logEnabled(LogLevel level) noexcept {
   return installedLog != nullptr && level >= installedLog->threshold();
 }
@@ -90,8 +91,10 @@ class TarnReportingLogger {
   // A function and not a category, so that a logger is a constant expression.
   using Category = const platform::LogCategory& (*)();
 
+  // `module` is the name in the prefix and must be static.
   constexpr TarnReportingLogger(Category category, std::string_view module) : category_(category), module_(module) {}
 
+  // Writes a line. The text is a constant, so its line number is that of the call.
   template <class... Arguments>
   void operator()(LogLevel level, const LogText& text, const Arguments&... arguments) const {
     if (detail::logEnabled(level)) [[unlikely]] {

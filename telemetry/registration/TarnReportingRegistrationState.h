@@ -39,6 +39,7 @@ class TarnReportingRegistrationState {
   double enumerationCheckEpoch();
   // Sets and stores.
   void scheduleNextInvocation(double epochSeconds);
+  // The same for the next enumeration.
   void scheduleEnumerationCheck(double epochSeconds);
   // Sets alone.
   void setEnumerationCheckEpoch(double epochSeconds) noexcept { enumerationCheckEpoch_ = epochSeconds; }

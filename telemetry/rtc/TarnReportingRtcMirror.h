@@ -88,6 +88,7 @@ class TarnReportingRtcMirror : public std::enable_shared_from_this<TarnReporting
   // one only a line tells so.
   void stop(const Stopped& session);
 
+  // The service's token for the period that runs; nothing before its start and after its end.
   const std::optional<std::string>& rtcReportingAgentToken() const noexcept { return rtcReportingAgentToken_; }
   // Sends one message; outside internal builds its record loses the time stamp. Without a session of the service
   // nothing is sent.

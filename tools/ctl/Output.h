@@ -30,6 +30,7 @@ class Output {
   // added. False once anything could not be written.
   bool line(std::string_view text);
 
+  // Whether everything could be written so far. Who prints much looks at it between two lines.
   bool good() const noexcept { return failure_.ok(); }
   // The exit status that the output itself asks for: success while it is good, and when the reader simply left; else it
   // complains and says failure. Call it at the end, once: it complains each time.

@@ -75,6 +75,7 @@ class ScriptPlayer {
   // Whether none was lost, but for those that the script asked to lose.
   bool checkConnections();
   void printReply(const script::ScriptStep& step, const client::Reply& reply);
+  // Stops as unreachable, with the reason of the loss.
   bool stopForLoss(const std::string& name, const Connection& connection);
   // Ends the script with this exit status and says why; false.
   bool stop(int status, const std::string& why);
