@@ -77,8 +77,8 @@ class TarnReportingSession : public std::enable_shared_from_this<TarnReportingSe
   // Takes a message in: stamps, cleans and tags it, tests it for redundancy, logs it and hands it to the workers; then
   // calls the reply, if there is one. How many workers got it. The record is the session's own from here on and is
   // changed in place. A redundant one is counted and updates the latest values, but it isn't logged and reaches only
-  // the workers that ask for such. It doesn't matter whether the session is started; before, only the workers that
-  // start on creation are there to get it.
+  // the workers that ask for such. It doesn't matter whether the session is started; but before the first start only
+  // the workers that start on creation are there to get it, and between a stop and the next start nobody is.
   std::size_t sendMessage(const MessagePointer& message, platform::Reply<> reply = nullptr);
 
   // The steps of the intake; each changes the record's payload in place. A payload without a time stamp gets the
@@ -103,7 +103,7 @@ class TarnReportingSession : public std::enable_shared_from_this<TarnReportingSe
   static double getEpochTimeFromTarnReportingStateMessage(const TarnReportingSessionMessage& message);
 
   // "reporterID=%lli,serviceName=%@,ownerPid=%li,clientProcessName=%@,HostApplicationDisplayID=%@,started=%i,
-  // singleMessageSession=%i" on one line The owner is the first process identifier, 0 without one. An unknown name is
+  // singleMessageSession=%i" on one line. The owner is the first process identifier, 0 without one. An unknown name is
   // "(null)", an unknown application "Unknown".
   std::string description() const;
 

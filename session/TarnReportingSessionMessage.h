@@ -47,7 +47,7 @@ class TARN_CAPABILITY TarnReportingSessionMessage {
 
   // Whether the message repeats an earlier one of its session.
   bool isRedundant() const noexcept { return isRedundant_; }
-  // For the session's intake, as the next setter.
+  // For the session's intake, as is setIsSessionStarted().
   void setIsRedundant(bool redundant) noexcept { isRedundant_ = redundant; }
   // Whether the session was started when the message arrived.
   bool isSessionStarted() const noexcept { return isSessionStarted_; }
