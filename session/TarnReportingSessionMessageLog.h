@@ -24,33 +24,44 @@ class TarnReportingSessionMessageLog {
  public:
   using Record = TarnReportingSessionMessageList::Record;
 
+  // The ID is for lines about the overflow alone.
   explicit TarnReportingSessionMessageLog(std::int64_t reporterID) : messages_(reporterID) {}
 
   void setAccount(std::shared_ptr<TarnReportingSessionLogAccount> account) { messages_.setAccount(std::move(account)); }
+  // The record is the newest of its category and type from now on.
   void append(Record record);
-  // Sorts by time stamp (TarnReportingSessionMessage::sortMessages).
+  // Sorts by time stamp (TarnReportingSessionMessage::sortMessages). Without a pass over the look-up when nothing
+  // moved.
   void sort();
+  // The log is as new.
   void clear();
 
   // The record nearest to the end of the log, as it now stands, of this category and type; null when there is none. It
-  // holds until the next look-up.
+  // holds until the next look-up. One hash look-up; a read from the store when the record overflowed and isn't kept.
   const TarnReportingSessionMessage* newest(AudioEventCategory category, AudioEventType type) const;
 
+  // Who changes a record of it in place does so by the list's change().
   const TarnReportingSessionMessageList& messages() const noexcept { return messages_; }
+  // In records, the markers of start and stop included.
   std::size_t size() const noexcept { return messages_.size(); }
 
  private:
+  // Where the newest record of a kind is.
   struct Newest {
     std::size_t index = 0;
     const TarnReportingSessionMessage* recent = nullptr;  // while the log itself has it in memory
     Record kept;                                          // else, when it was read back
   };
+  // Kinds whose overflowed record is kept in memory, at the cost of a record each.
   static constexpr std::size_t kMostKept = 256;
 
+  // Replaces what was the newest record of a kind, and lets go of its copy.
   void note(Newest& newest, std::size_t index, const TarnReportingSessionMessage* recent) noexcept;
+  // Lets go of all copies: a sort moved the records, or a producer changed one.
   void forgetKept() const;
 
   TarnReportingSessionMessageList messages_;
+  // By category and type in one number.
   mutable std::unordered_map<std::uint64_t, Newest> newest_;
   mutable std::size_t kept_ = 0;
   mutable std::uint64_t changesSeen_ = 0;  // of the records that are kept here

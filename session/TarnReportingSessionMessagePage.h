@@ -2,6 +2,9 @@
 // store. A page never changes; who changes a record makes a new page.
 //
 // Threads: any.
+//
+// A page is self-contained but for the names of destination workers, which are static texts of the program and stay in
+// memory: a page has no meaning for another process. A checksum at its end sees what a disk did to it.
 #pragma once
 
 #include <atomic>
@@ -21,29 +24,35 @@ namespace tarn {
 class TarnReportingSessionMessagePage {
  public:
   using Record = std::shared_ptr<TarnReportingSessionMessage>;
-  // Of all pages that share them.
+  // Of all pages that share them. Atomic, since the last owner of a page may let go of it on another thread, as
+  // summaries do that are made off the server queue.
   struct Counts {
     std::atomic<std::size_t> bytesInStore = 0;
     std::atomic<std::size_t> bytesInMemory = 0;  // of those that the store had no room for
     std::atomic<std::uint64_t> recordsLost = 0;  // that couldn't be read back
   };
 
-  // Takes records one by one, then makes a page of them.
+  // Takes records one by one, then makes a page of them. For one page. Threads: the server queue.
   class Maker {
    public:
+    // A guess saves copies of the image as it grows; 0 is no guess.
     explicit Maker(std::size_t expectedBytes) { image_.reserve(expectedBytes); }
     Maker(const Maker&) = delete;
     Maker& operator=(const Maker&) = delete;
 
+    // Payload, category, type, flags and destinations go into the page; the record's guard and identity don't.
     void add(const TarnReportingSessionMessage& record);
-    // The page, which lies in the store; nothing is kept after an error.
+    // The page, which lies in the store; nothing is kept after an error. The error is the store's. The image is still
+    // here then, for finishInMemory().
     Result<std::shared_ptr<const TarnReportingSessionMessagePage>> finish(platform::OverflowStore& store,
                                                                           const std::shared_ptr<Counts>& counts);
     // The page when that went wrong: it stays in memory.
     std::shared_ptr<const TarnReportingSessionMessagePage> finishInMemory(const std::shared_ptr<Counts>& counts);
 
    private:
+    // The page with what was added so far; the maker is spent.
     std::shared_ptr<TarnReportingSessionMessagePage> makePage(const std::shared_ptr<Counts>& counts);
+    // The place of these destinations in the page's table plus one; 0 for everyone.
     std::size_t numberOf(const TarnReportingSessionMessage::DestinationWorkers& destinations);
 
     std::string image_;
@@ -58,25 +67,34 @@ class TarnReportingSessionMessagePage {
 
   TarnReportingSessionMessagePage(const TarnReportingSessionMessagePage&) = delete;
   TarnReportingSessionMessagePage& operator=(const TarnReportingSessionMessagePage&) = delete;
+  // Gives back what it takes in the store.
   ~TarnReportingSessionMessagePage();
 
-  // The records, made anew by each call. None when they can't be read back, which is counted and logged.
+  // The records, made anew by each call. None when they can't be read back, which is counted and logged. A read that
+  // fails is tried once more, since a fault may have been the moment's. The loss has one error line, with the number of
+  // messages and the reason.
   std::vector<Record> read() const;
 
+  // In records.
   std::size_t size() const noexcept { return size_; }
-  // By TarnReportingSessionMessage::sortingTime.
+  // By TarnReportingSessionMessage::sortingTime. Of the first and the last record in their order, which are the
+  // earliest and the latest when the page is sorted.
   double firstTime() const noexcept { return firstTime_; }
   double lastTime() const noexcept { return lastTime_; }
+  // Whether each record's time is at least that of the one before it.
   bool isSorted() const noexcept { return isSorted_; }
 
  private:
   TarnReportingSessionMessagePage() = default;
+  // Fails with the store's error, or with a text of its own when the page is cut or damaged.
   Result<std::vector<Record>> tryToRead() const;
 
   platform::OverflowStore* store_ = nullptr;  // null: the image is in memory
   platform::OverflowStore::Place place_ = 0;
+  // What it takes in the store, told back to the counts at its end.
   std::size_t storedBytes_ = 0;
   std::shared_ptr<Counts> counts_;
+  // The records one after the other, then the checksum; empty when the store has it.
   std::string image_;
   std::vector<TarnReportingSessionMessage::DestinationWorkers> destinations_;
   std::size_t size_ = 0;
