@@ -16,6 +16,7 @@ class Bytes {
   Bytes& operator=(const Bytes&) = delete;
   ~Bytes() { std::free(data_); }
 
+  std::uint8_t* data() noexcept { return data_; }
   const std::uint8_t* data() const noexcept { return data_; }
   std::size_t size() const noexcept { return size_; }
   bool failed() const noexcept { return failed_; }
