@@ -6,6 +6,7 @@
  */
 #pragma once
 
+/* C knows it by this name alone. NOLINTNEXTLINE(modernize-deprecated-headers) */
 #include <stdint.h>
 
 #define TARNRING_MAGIC UINT64_C(0x474E49524E524154) /* the bytes TARNRING */
@@ -20,6 +21,7 @@
 #define TARNRING_MOST_KEYS 64U
 #define TARNRING_MOST_KEY_BYTES 255U
 
+/* Names as C has them: NOLINTBEGIN(readability-identifier-naming) */
 enum tarnring_kind { TARNRING_FILLER = 1, TARNRING_FRAME = 2, TARNRING_MESSAGE = 3, TARNRING_GAP = 4 };
 
 /* Why a record was refused. */
@@ -73,3 +75,4 @@ struct tarnring_gap {
 static inline uint32_t tarnring_padded(uint32_t length) {
   return (length + 7U) & ~UINT32_C(7);
 }
+/* NOLINTEND(readability-identifier-naming) */
