@@ -113,8 +113,7 @@ class RingConsumer {
   // Position and number of messages up to which records were accepted, published or not.
   std::uint64_t taken() const noexcept { return taken_; }
   std::uint64_t takenMessages() const noexcept { return takenMessages_; }
-  // As the writer tells it, which may be wrong.
-  // How many records found no room, likewise.
+  // As the writer tells them, which may be wrong: up to where it published, and how many records found no room.
   std::uint64_t head() const noexcept { return Words::loadAcquire(&header_->head); }
   std::uint64_t dropped() const noexcept { return Words::load(&header_->dropped); }
   // Whether the writer said that nothing more comes. What it published before may still wait to be read.
