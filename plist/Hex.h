@@ -6,6 +6,7 @@
 
 namespace tarn::plist {
 
+// Appends one byte as two digits, the high half first.
 inline void appendHex(std::string& out, char byte) {
   constexpr std::string_view kDigits = "0123456789abcdef";
   const auto value = static_cast<unsigned char>(byte);
@@ -13,6 +14,7 @@ inline void appendHex(std::string& out, char byte) {
   out += kDigits[value & 0xFU];
 }
 
+// Appends all bytes, without blanks between them or a mark before.
 inline void appendHex(std::string& out, std::string_view bytes) {
   for (const char byte : bytes) {
     appendHex(out, byte);

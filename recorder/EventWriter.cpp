@@ -85,8 +85,9 @@ Status EventWriter::openOnce() {
 void EventWriter::tellWhatOpeningFound() {
   const std::string path = file_.path().string();
   for (const std::string& name : file_.takePutAside()) {
-    log_.error("recorder file " + path +
-               " had something in its log's place that is no regular file; it is set aside as " + name);
+    std::string line = "recorder file " + path;
+    line.append(" had something in its log's place that is no regular file; it is set aside as ").append(name);
+    log_.error(line);
   }
   if (const std::int64_t last = file_.takeGoneUpTo(); last > 0) {
     log_.error("recorder file " + path + " holds nothing of the events up to " + std::to_string(last) +

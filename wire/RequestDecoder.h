@@ -33,6 +33,8 @@ enum class DecodeVerdict {
 
 struct Refusal {
   ErrorCode code = ErrorCode::BadArguments;
+  // For people: the operation's name, and what was expected in the place; or what makes the frame unreadable. English,
+  // and never the client's own bytes, so it may go into a log as it is.
   std::string text;
 };
 

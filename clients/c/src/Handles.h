@@ -7,12 +7,14 @@
 namespace tarn::reporting {
 
 // Null when there is no memory.
+// Allocates and makes one by its default constructor. Null when there is no memory.
 template <class Handle>
 Handle* makeHandle() noexcept {
   void* const memory = std::malloc(sizeof(Handle));
   return memory != nullptr ? ::new (memory) Handle : nullptr;
 }
 
+// Ends and frees one that makeHandle() made.
 template <class Handle>
 void freeHandle(Handle* handle) noexcept {
   handle->~Handle();

@@ -8,7 +8,7 @@
 
 namespace tarn::reporting {
 
-// Bytes of the well-formed character at the front; 0 when there is none.
+// Bytes of the well-formed character at the front, 1 to 4; 0 when there is none. At least one byte must be left.
 inline std::size_t characterLength(const unsigned char* at, std::size_t left) noexcept {
   const unsigned first = at[0];
   if (first < 0x80) return 1;
@@ -24,6 +24,7 @@ inline std::size_t characterLength(const unsigned char* at, std::size_t left) no
   return length;
 }
 
+// Whether all of it is well-formed; of an empty text it is. Used in post(), so it neither allocates nor calls anything.
 inline bool isUtf8(const char* text, std::size_t length) noexcept {
   const auto* at = reinterpret_cast<const unsigned char*>(text);
   std::size_t left = length;
