@@ -22,6 +22,7 @@ class LinuxWorkQueues final : public platform::WorkQueues {
   static constexpr std::size_t kThreads = 4;
   static constexpr std::string_view kServerQueueName = "sys.oxbow.tarnkit.reporting.server";
 
+  // The clock outlives the pool, and with it the queues. Makes no thread.
   LinuxWorkQueues(const platform::Clock& clock, std::shared_ptr<platform::WorkQueue> serverQueue,
                   WorkerPool::Marks marks = {});
   LinuxWorkQueues(const LinuxWorkQueues&) = delete;
@@ -29,13 +30,15 @@ class LinuxWorkQueues final : public platform::WorkQueues {
   // Runs what is ready on the pool's queues, then ends the threads.
   ~LinuxWorkQueues() override;
 
-  // The threads are started with the first queue that needs them.
+  // The queue of the name kServerQueueName is the server queue, each time the same one; every other call makes a new
+  // queue, whatever its name. The quality of service isn't used: the pool's threads are all alike. The threads are
+  // started with the first queue that needs them.
   std::shared_ptr<platform::WorkQueue> makeSerialQueue(std::string_view name,
                                                        platform::QualityOfService quality) override;
   std::shared_ptr<platform::SuspendableQueue> makeSuspendableQueue(std::string_view name,
                                                                    platform::QualityOfService quality) override;
 
-  // Of the pool's queues; see WorkerPool.
+  // Of the pool's queues; see WorkerPool. The server queue's own work isn't in these.
   void setRoomHandler(WorkerPool::RoomHandler handler) { pool_->setRoomHandler(std::move(handler)); }
   bool isFull() const noexcept { return pool_->isFull(); }
   std::size_t unfinished() const { return pool_->unfinished(); }
