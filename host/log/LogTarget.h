@@ -1,6 +1,6 @@
 // openLog: makes the log that a target names. The one place that knows which outputs there are.
 //
-// Threads: one at a time; the entry point, before anything else is made.
+// Threads: one at a time; called once, by HostSetup.
 #pragma once
 
 #include <memory>
