@@ -1,5 +1,5 @@
 // LinuxWorkQueues: makes the serial queues of the process. The reporting server queue is the main loop's own; all
-// others share a small pool of threads.
+// others share a small pool of threads, which are all alike: the quality of service that is asked for isn't used.
 //
 // What waits on the pool's queues is bounded by whoever takes work in from outside: it stops while isFull() is true and
 // goes on when the room handler is called.
@@ -20,6 +20,8 @@ class LinuxWorkQueues final : public platform::WorkQueues {
   // Enough for the few queues that block now and then (two tools at once) not to hold up the others. A queue that waits
   // for a back-end is suspended and holds none.
   static constexpr std::size_t kThreads = 4;
+  // Who asks for a queue of this name gets the server queue, each time the same one; every other name makes a new
+  // queue.
   static constexpr std::string_view kServerQueueName = "sys.oxbow.tarnkit.reporting.server";
 
   // The clock outlives the pool, and with it the queues. Makes no thread.
@@ -30,9 +32,7 @@ class LinuxWorkQueues final : public platform::WorkQueues {
   // Runs what is ready on the pool's queues, then ends the threads.
   ~LinuxWorkQueues() override;
 
-  // The queue of the name kServerQueueName is the server queue, each time the same one; every other call makes a new
-  // queue, whatever its name. The quality of service isn't used: the pool's threads are all alike. The threads are
-  // started with the first queue that needs them.
+  // The threads are started with the first queue that needs them.
   std::shared_ptr<platform::WorkQueue> makeSerialQueue(std::string_view name,
                                                        platform::QualityOfService quality) override;
   std::shared_ptr<platform::SuspendableQueue> makeSuspendableQueue(std::string_view name,

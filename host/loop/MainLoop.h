@@ -38,8 +38,9 @@ class EventHandler {
   // `events` as epoll tells them (EPOLLIN, EPOLLOUT, EPOLLHUP, ...). May watch, change and unwatch descriptors, its own
   // included; must not block. Several events of one look may be for one handler.
   virtual void handleEvents(std::uint32_t events) = 0;
-  // Asked for with flushLater(); called once, after the turn's work. What many replies of one turn need one system call
-  // for stands here.
+  // Asked for with flushLater(); called as often as it was asked for, after the turn's work. What many replies of one
+  // turn need one system call for stands here. Asked for by a flush, it comes in the next turn, which then doesn't
+  // sleep.
   virtual void flush() {}
 };
 
@@ -65,9 +66,8 @@ class MainLoop {
   QueueProgress& progress() noexcept { return progress_; }
   const platform::Clock& clock() const noexcept { return clock_; }
 
-  // Calls the handler for these events of the descriptor until unwatch(). Fails when the system doesn't take it (EEXIST
-  // when it is watched already, EPERM for a plain file, ENOSPC past the user's limit of watches); then the handler
-  // isn't held. A descriptor is unwatched before it is closed, by its owner: the loop owns none of them.
+  // Calls the handler for these events of the descriptor until unwatch(). Fails when the system doesn't take it. A
+  // descriptor is unwatched before it is closed.
   [[nodiscard]] Status watch(int descriptor, std::uint32_t events, std::shared_ptr<EventHandler> handler);
   // Waits for these events from now on instead; 0 leaves only errors and hang-ups. Only of a watched descriptor. A call
   // to the system, so callers remember what they asked for.
@@ -76,8 +76,7 @@ class MainLoop {
   // destroyed by this call.
   void unwatch(int descriptor);
 
-  // Calls handler->flush() once, before the loop waits for events. Asked twice it is called twice, so a handler
-  // remembers that it asked. Asked during the flushes it is called in the next turn, which then doesn't sleep.
+  // Calls handler->flush() once, before the loop waits for events.
   void flushLater(std::shared_ptr<EventHandler> handler) { flushes_.push_back(std::move(handler)); }
   // Flushes at once what waits for the turn's end, for a turn that has none because the process ends in it.
   void flushAll();
@@ -85,8 +84,7 @@ class MainLoop {
   // the loop's last turn.
   void addTurnHook(TurnHook hook) { hooks_.push_back(std::move(hook)); }
 
-  // Serves until stop(). Replies that are ready by then are flushed; work that waits then is left. To be called once,
-  // by the thread that the queue belongs to from then on.
+  // Serves until stop(). Replies that are ready by then are flushed; work that waits then is left.
   void run();
   // Ends run() after the turn that it is in, and waitUntil() at its next look. Any thread; once stopped a loop doesn't
   // run again. Not for signal handlers: it takes the queue's lock.

@@ -33,8 +33,7 @@ class WorkLane {
     WorkLane* previous_;
   };
 
-  // `queue` tells lanes of one queue from those of another: work for a second queue, handed over in the scope of a lane
-  // of the first, isn't the lane's. It is compared, never called.
+  // `queue` tells lanes of one queue from those of another.
   explicit WorkLane(const platform::WorkQueue* queue) noexcept : queue_(queue) {}
   WorkLane(const WorkLane&) = delete;
   WorkLane& operator=(const WorkLane&) = delete;

@@ -121,7 +121,6 @@ class WorkerPool {
   void look() TARN_REQUIRES(mutex_);
   // Until somebody wakes it or the earliest moment comes.
   void sleep() TARN_REQUIRES(mutex_);
-  // One turn of the line on the calling thread; lets go of the lock meanwhile.
   void runSome(const std::shared_ptr<Line>& line) TARN_REQUIRES(mutex_);
   // So many less; at the low mark the room handler is called, without the lock.
   void account(std::size_t finished) TARN_REQUIRES(mutex_);
@@ -135,11 +134,8 @@ class WorkerPool {
   ConditionVariable ended_;    // for the one that is about to look
   ConditionVariable settled_;
   ConditionVariable turnEnded_;  // for those who help
-  // Threads in help(): without one, the end of a turn tells nobody.
   std::size_t helpers_ TARN_GUARDED_BY(mutex_) = 0;
-  // Each line at most once, first come first served.
   std::deque<std::shared_ptr<Line>> runnable_ TARN_GUARDED_BY(mutex_);
-  // As many as threads at work, helpers included.
   std::vector<std::shared_ptr<Line>> running_ TARN_GUARDED_BY(mutex_);
   DelayedWork<Delayed> delayed_ TARN_GUARDED_BY(mutex_);
   Suspensions suspensions_ TARN_GUARDED_BY(mutex_);

@@ -24,7 +24,6 @@ enum class RingFault : std::uint8_t {
   Broken,   // open: positions or lengths that make no sense
 };
 inline constexpr std::size_t kRingFaults = 8;
-// Refusals are numbered from 1 to the last one's number, as they stand in the ring.
 inline constexpr std::size_t kRingRefusals = TARNRING_BAD_VALUES;
 
 struct RingCounts {
