@@ -1,4 +1,5 @@
-// RecorderOptions: where the recorder writes and every bound that it keeps, with what happens at each.
+// RecorderOptions: where the recorder writes and every bound that it keeps, with what happens at each. Plain data, read
+// once when the recorder is made; the configuration sets the retention, the rest are constants but for tests.
 #pragma once
 
 #include <chrono>
@@ -11,6 +12,8 @@
 namespace tarn::recorder {
 
 struct RecorderOptions {
+  // The database; its log, the log's index, the counts and files set aside lie beside it under names that begin with
+  // its own.
   std::filesystem::path file;
 
   // Retention: beyond either, the oldest events go first. A megabyte is 2^20 bytes; at least one is kept. The size is
@@ -22,11 +25,13 @@ struct RecorderOptions {
   std::chrono::milliseconds maintenanceInterval{60'000};
 
   // Commits: a group is written this long after its first event at the latest, earlier when nothing new has come for
-  // the quiet time or when the group is large. While many come, company is worth more time.
+  // the quiet time or when the group is large. While many come (the last group had busyGroupEvents), company is worth
+  // more time.
   std::chrono::milliseconds groupTime{4};
   std::chrono::milliseconds quietTime{1};
   std::chrono::milliseconds busyGroupTime{20};
   std::size_t busyGroupEvents = 512;
+  // A group of this size is written at once.
   std::size_t groupEvents = 4096;
   std::size_t groupBytes = std::size_t{4} << 20;
 
@@ -56,7 +61,7 @@ struct RecorderOptions {
   // After a fault the next try comes after the first pause, each further one after twice as long, up to the last.
   std::chrono::milliseconds firstRetry{250};
   std::chrono::milliseconds lastRetry{1000};
-  // How often a shutdown tries a disk that fails before what waits is given up.
+  // How often a shutdown tries a disk that fails before what waits is given up, and the pause between two tries.
   int shutdownTries = 3;
   std::chrono::milliseconds shutdownRetry{100};
 

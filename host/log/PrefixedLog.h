@@ -19,10 +19,14 @@ inline constexpr platform::LogCategory kDriverCategory{"sys.oxbow.tarnkit", "tar
 // The performance traces and their analysis.
 inline constexpr platform::LogCategory kTraceCategory{"sys.oxbow.tarnkit", "tarnrt"};
 
+// Forms and writes one entry unless it is below the log's threshold, which costs one load. `module` names the part that
+// speaks and is a text of the program, as the flood guard keeps it; `line` is the caller's own, by the default
+// argument.
 void logPrefixed(platform::Log& log, const platform::LogCategory& category, platform::LogLevel level,
                  std::string_view module, std::string_view text, int line = __builtin_LINE());
 
-// The text with the prefix of its module and line, as every line has it.
+// The text with the prefix of its module and line, as every line has it: the module right-aligned to 25 columns. For
+// those who write the entry themselves.
 std::string prefixed(std::string_view module, std::string_view text, int line = __builtin_LINE());
 
 }  // namespace tarn::linux_host

@@ -24,13 +24,15 @@ class ConnectionEnds {
   ConnectionEnds(const ConnectionEnds&) = delete;
   ConnectionEnds& operator=(const ConnectionEnds&) = delete;
 
+  // The connection begins to end; a second call changes nothing. From here on whoever asks waits for it.
   void begin(Place& place) {
     if (place == 0) {
       place = ++last_;
       ends_.insert(place);
     }
   }
-  // All that the end made is handed over.
+  // All that the end made is handed over, so nothing of it can come any more. Calls those that waited for it and for no
+  // earlier one, in the order in which they asked; they may come back here.
   void finish(Place place) {
     ends_.erase(place);
     while (!waiting_.empty() && (ends_.empty() || *ends_.begin() > waiting_.front().after)) {
@@ -39,7 +41,8 @@ class ConnectionEnds {
       then();
     }
   }
-  // Calls `then` once all ends that are under way now are over: at once when there is none.
+  // Calls `then` once all ends that are under way now are over: at once when there is none. Ends that begin later
+  // aren't waited for, so a stream of clients that go can't hold anybody up. It is destroyed uncalled with this.
   void afterThese(platform::Work then) {
     if (ends_.empty()) {
       then();
@@ -49,6 +52,7 @@ class ConnectionEnds {
   }
 
  private:
+  // Somebody who waits for the ends up to this number; numbers only grow, so those who wait stand in order.
   struct Waiting {
     Place after;
     platform::Work then;

@@ -23,7 +23,9 @@ class NumbersReply {
 
   std::uint64_t id() const noexcept { return id_; }
   std::size_t count() const noexcept { return numbers_.size(); }
+  // The numbers as the wire has them, without the head of the reply; looks into this object.
   std::string_view encoded() const noexcept { return encoded_; }
+  // Whether all numbers are bytes.
   bool whole() const noexcept { return done_ == numbers_.size(); }
   // Encodes up to so many more.
   void encode(std::size_t most) {

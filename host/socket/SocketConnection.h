@@ -40,7 +40,7 @@ class SocketConnection final : public platform::Connection,
                                public std::enable_shared_from_this<SocketConnection> {
  public:
   // Takes over a connected socket that doesn't block. `number` names it in logs, from 1. The host outlives the
-  // connection.
+  // connection. Asks the kernel who the client is; nothing is received yet.
   SocketConnection(ConnectionHost& host, UniqueDescriptor socket, std::uint64_t number);
   SocketConnection(const SocketConnection&) = delete;
   SocketConnection& operator=(const SocketConnection&) = delete;
@@ -48,22 +48,32 @@ class SocketConnection final : public platform::Connection,
 
   std::int32_t processIdentifier() const override { return client_.process; }
   const LogClient& client() const noexcept { return client_; }
-  // With number, process, user and executable of the client, as they were when it connected.
+  // With number, process, user and executable of the client, as they were when it connected: the client may have become
+  // another program since.
   std::string description() const override { return description_; }
+  // What requests are called on; set before resume() and held until the end's handlers have run.
   void setExportedObject(std::shared_ptr<platform::TarnReportingServiceProtocol> object) override;
+  // Called at an end that was not in order, before the invalidation handler; both at most once, on the server queue,
+  // after the work of all requests.
   void setInterruptionHandler(Handler handler) override { interruptionHandler_ = std::move(handler); }
   void setInvalidationHandler(Handler handler) override { invalidationHandler_ = std::move(handler); }
+  // Begins to receive and counts as open. Once; does nothing when it was resumed.
   void resume() override;
   // For a user that has as many connections as it may: instead of setting it up and resuming it. It answers every
-  // request but `status` with this text until the client ends it.
+  // request but `status` with this text (error 4) until the client ends it, so that a client learns why.
   void refuse(std::string why);
   std::uint32_t user() const noexcept { return party().user; }
 
+  // The socket became ready: asks for a turn, or while requests aren't taken looks only for a `status` at the head.
   void handleEvents(std::uint32_t events) override;
+  // Sends what is there, or puts that off by some turns while more replies are about to come.
   void flush() override;
+  // Shuts the socket's reading side; the end then comes the way it always does.
   void endInput() override;
+  // The client's part of the loop's work: its lane, then frame after frame, while the credit lasts.
   Turn takeTurn(std::int64_t credit) override;
   void finishWork() override;
+  // Cuts the connection off.
   void endHalfFrame(const std::string& why) override;
 
   void sendReply(std::uint64_t id, std::initializer_list<plist::ValueView> results) override;
@@ -71,6 +81,7 @@ class SocketConnection final : public platform::Connection,
   void sendError(std::uint64_t id, const platform::RemoteError& error) override;
   void dropReply() override { output_.countDropped(); }
 
+  // Not before there is an object, after the end's handlers, or while this user's requests aren't taken.
   bool takesRingRequests() override { return object_ != nullptr && host_.takesFrom(&party()); }
   void serveRingRequest(wire::DecodedRequest& request) override;
   void afterRingRequests(platform::Work work) override;
@@ -84,37 +95,53 @@ class SocketConnection final : public platform::Connection,
   };
 
   std::shared_ptr<ShareHolder> self() { return shared_from_this(); }
+  // Which events the loop is to tell; 0 for none. Asks the system only when that changes.
   void watch(std::uint32_t events);
-  // Whether bytes came.
+  // One gulp into the frame buffer; whether bytes came. The client's end shows here.
   bool receive();
-  // Does the next thing that is to be done; whether there was one.
+  // Does the next thing that is to be done, in this order: work of the lane, the held request, the next whole frame,
+  // more bytes; whether there was one.
   bool serveNext();
   bool serveNextFrame();
+  // Decodes one whole frame: a request, one that is answered with a refusal, or the end of the connection.
   void serveFrame(std::span<const std::byte> frame);
   void serveRequest(wire::DecodedRequest& request, std::size_t frameBytes);
+  // Keeps the request until it may be taken; it is the only one, as nothing is decoded after it. Refused when the
+  // user's waiting bytes are used up.
   void hold(wire::DecodedRequest& request, std::size_t frameBytes);
+  // Answers once all that this connection sent before is committed.
   void settle(std::uint64_t id);
   // Why the request is beyond a quota; empty when it is not.
   std::string quotaRefusal(const wire::Request& request);
+  // Answers with error 4, over quota.
   void refuseRequest(std::uint64_t id, const std::string& why);
-  // Keeps what is known of the use of quotas in step.
+  // Keeps what is known of the use of quotas in step, at the end of each turn.
   void countSessions();
   void countWaitingBytes(std::size_t half);
-  // While the gate is shut: answers `status` and stops at the first other request.
+  // While the gate is shut: answers `status` and stops at the first other request. At most one gulp is received for
+  // that, so what else the client sends waits with the system and stops it.
   void stopAtHead(std::uint32_t events);
+  // openRing takes the descriptors that came last; declareShape is answered at once. Both also while the gate is shut:
+  // they hand nothing on.
   void serveRingOperation(const wire::DecodedRequest& request);
   void answerRingOperation(std::uint64_t id, plist::ValueView result, const Status& done);
 
   // Sends the reply, or counts it as dropped when nobody can get it any more.
   template <class... Content>
   void reply(const Content&... content);
+  // Encodes some more of a long reply; the rest waits in the lane, ahead of the client's next request.
   void sendRest(NumbersReply numbers);
-  // Whether the replies had better go out with those of the next turns.
+  // Whether the replies had better go out with those of the next turns: while more of the client's requests wait to be
+  // served, up to 4 KiB and 8 turns.
   bool gathersReplies();
 
+  // The client closed, or is gone: inside a frame that is a cut, else an end in order or a reset.
   void peerEnded(bool reset);
+  // An end that isn't in order: counted, logged with the client, nothing more is sent.
   void cut(CutReason reason, const std::string& why);
+  // No more is received. Rings are read to their end, then the work that was handed over is done, then comes finish().
   void beginEnd(bool interrupted);
+  // The handlers, the close, and the place of the end given back after what the handlers left to be done.
   void finish(bool interrupted);
 
   ConnectionHost& host_;

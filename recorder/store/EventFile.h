@@ -36,73 +36,87 @@ namespace tarn::recorder {
 
 class EventFile {
  public:
-  // `boot` tells this boot of the system from others.
+  // `boot` tells this boot of the system from others; the clock outlives this. Nothing is opened.
   EventFile(std::filesystem::path path, const RetentionLimits& limits, const platform::Clock& clock, std::string boot);
 
   const std::filesystem::path& path() const noexcept { return path_; }
 
-  // What an earlier run is known to have committed. Before the first open().
+  // The last id that an earlier run is known to have committed, from which open() tells what is missing. Before the
+  // first open().
   void expect(std::int64_t lastId) noexcept { lastId_ = expected_ = lastId; }
-  // Opens the file, makes it when there is none, checks it through (once a file). Reads all of it the first time.
+  // Opens the file, makes it and its folders when there is none, checks it through (once a file, which reads all of
+  // it). After an error it is closed.
   [[nodiscard]] Status open();
   bool isOpen() const noexcept { return connection_.isOpen(); }
-  // Closes; when all is well the write-ahead log is brought in and removed.
+  // Closes; when all is well the write-ahead log is brought in and removed, so that a copy of the one file is whole.
   void close() noexcept;
+  // Closes as it is: the log stays, for the next one to open the file.
   void closeAfterFault() noexcept;
-  // The same, and the next open() reads the file through again.
+  // The same, and the next open() reads the file through again: what was found may have been an error of the reading.
   void closeForAnotherLook() noexcept;
   // Closes a file that was moved away, having brought its write-ahead log in, so that it is whole where it went.
   void leave() noexcept;
-  // Gives the closed file and what belongs to it another name, which is the value.
+  // Gives the closed file and what belongs to it another name ("FILE.damaged-SECONDS"), which is the value. Fails with
+  // the system's reason when it can't be renamed; then it is where it was.
   [[nodiscard]] Result<std::filesystem::path> setAside();
 
+  // Begins a transaction, once the file at the path and its log are found to be those that were opened. Nobody else can
+  // write until it is over; a lock of another's is waited for 50 ms.
   [[nodiscard]] Status begin();
+  // Adds an event under the next id, in a transaction. Texts are looked at during the call only; a time that isn't a
+  // number is stored as 0.
   [[nodiscard]] Status append(const StoredEvent& event);
   // The same for an event that another file held, with its id and the time of its group. Ids rise; none is above that
-  // of an event of ours.
+  // of an event of ours. An id that is there already is replaced by the same.
   [[nodiscard]] Status carry(std::int64_t id, double seconds, const StoredEvent& event);
-  // Notes ids that were committed once and are in no file now.
+  // Notes ids that were committed once and are in no file now, so that nobody looks for them again; in a transaction.
   [[nodiscard]] Status noteLoss(const IdRange& lost);
-  // What was carried begins with this id, and whoever reads along goes on after the last one.
+  // What was carried begins with this id, and whoever reads along goes on after the last one. In a transaction, after
+  // the last carry().
   [[nodiscard]] Status noteCarried(std::int64_t first);
-  // Removes what retention doesn't keep, until `deadline` at the latest.
+  // Removes what retention doesn't keep, until `deadline` at the latest; in a transaction, after its appends.
   [[nodiscard]] Status expire(std::chrono::steady_clock::time_point deadline);
+  // Ends the transaction and synchronises it: what was appended is safe when this succeeds.
   [[nodiscard]] Status commit();
-  // Of the rows of a commit that failed, how many the file holds now that it is open again; told once.
+  // Of the rows of a commit that failed, how many the file holds now that it is open again, from the first one on; told
+  // once. They are committed: whoever appended them goes on after them.
   std::int64_t takeRowsInDoubt() noexcept;
-  // Whether a commit failed and the file could not be asked yet.
+  // Whether a commit failed and the file could not be asked yet. Then nobody knows which ids after lastId() were given.
   bool isInDoubt() const noexcept { return inDoubt_ > 0; }
 
-  // Now, on the recorder's own time.
+  // Now, on the recorder's own time, which goes on from what the file noted; after open().
   double seconds() const noexcept { return time_.seconds(); }
   // The id of the last committed event, in this file or in those before it.
   std::int64_t lastId() const noexcept { return lastId_; }
-  // Never two events with one id: the ids of a file that was set aside count too.
+  // Never two events with one id: the ids of a file that was set aside count too. Only forward.
   void skipTo(std::int64_t lastId) noexcept { lastId_ = std::max(lastId_, lastId); }
-  // Ids that were committed and weren't in the file when it was opened: its log was cut or taken away.
+  // Ids that were committed and weren't in the file when it was opened: its log was cut or taken away. Told once.
   std::optional<IdRange> takeMissing() noexcept { return std::exchange(missing_, std::nullopt); }
   // The last id of events that were expected in a file that holds nothing; 0 for none. Told once.
   std::int64_t takeGoneUpTo() noexcept { return std::exchange(goneUpTo_, 0); }
-  // What was put out of the way to open the file, by its new name.
+  // What was put out of the way to open the file, by its new name. Told once.
   std::vector<std::string> takePutAside() noexcept { return std::exchange(putAside_, {}); }
 
   // Compares rows with their checksums, from where it stopped until the deadline. Nothing when all is well so far;
   // damage as an error. A reading error too; then the check starts again.
   [[nodiscard]] Status verify(std::chrono::steady_clock::time_point deadline);
+  // Whether the check came to the file's end, or none has begun.
   bool isVerified() const noexcept { return check_.isDone(); }
 
-  // Whether retention has more to remove than the last expire() got to.
+  // Whether retention has more to remove than the last expire() got to. Another one is due soon then.
   bool hasMoreToExpire() const noexcept { return retention_.hasMore(); }
-  // Events removed by the transactions committed so far.
+  // Events removed by the transactions committed so far, since this was made.
   std::uint64_t expired() const noexcept { return expired_; }
 
   // What the database may take, and how large its log grows before it is brought in while commits go on. At twice the
   // size they wait for it.
   void setMaxBytes(std::int64_t maxBytes) noexcept { retention_.setMaxBytes(maxBytes); }
   void setLogLimit(std::int64_t bytes) noexcept { logLimit_ = bytes; }
-  // Of the log, which a reader that holds on to an old state keeps from starting again.
+  // Of the log after the last commit, in bytes; a reader that holds on to an old state keeps it from starting again,
+  // and so it grows.
   std::int64_t logBytes() const noexcept { return logBytes_; }
-  // Brings the write-ahead log into the database when it has grown large enough.
+  // Brings the write-ahead log into the database when it has grown large enough: aside while commits go on, or here,
+  // blocking, when it is twice that large. A reader in the way is no error.
   [[nodiscard]] Status checkpointIfDue();
   // Whether that isn't over yet: another look will help.
   bool hasMoreToBringIn() const noexcept { return logPages_ * pageBytes_ >= logLimit_; }
@@ -121,10 +135,13 @@ class EventFile {
   [[nodiscard]] Status checkIndex() const;
   std::int64_t indexBytes() const;
   [[nodiscard]] Status insertAs(std::int64_t id, const StoredEvent& event, Statement& statement);
+  // The checksums of what was appended since the last row of them; SQLite's result code.
   [[nodiscard]] int writeGroup();
   std::filesystem::path freeName(const std::string& suffix) const;
+  // The parts of open(), in their order.
   [[nodiscard]] Status openConnection();
   [[nodiscard]] Status checkContent();
+  // What the file holds of a commit that failed, made safe before it counts.
   [[nodiscard]] Status settleDoubt();
   [[nodiscard]] Status prepareStatements();
   void finalizeStatements() noexcept;

@@ -20,6 +20,7 @@
 
 namespace tarn::recorder {
 
+// One event, as it stands in the file.
 struct EventRow {
   std::int64_t id = 0;
   double time = 0;  // epoch seconds
@@ -29,14 +30,16 @@ struct EventRow {
   std::string detail;   // JSON
 };
 
+// Which events; all that is given must hold.
 struct EventQuery {
   std::optional<std::string> backend;
   std::optional<std::string> nameGlob;  // see globMatches
   std::int64_t after = 0;               // events with greater ids
+  // Rows of a page at the most.
   std::size_t limit = 1000;
 };
 
-// What a query found.
+// What a query found, all of one moment.
 struct EventPage {
   bool missing = false;        // there is no file, or none with events in it yet: nothing else is told
   std::vector<EventRow> rows;  // by ascending id
@@ -48,16 +51,21 @@ struct EventPage {
 
 class EventReader {
  public:
+  // Opens nothing. The file need not be there yet.
   explicit EventReader(std::filesystem::path file);
   EventReader(const EventReader&) = delete;
   EventReader& operator=(const EventReader&) = delete;
 
-  // The error names the file.
+  // The next page, by ascending id, of one state of the file. The error names the file: it can't be opened, is damaged,
+  // or costs more to read than its bytes are worth. A later call tries again from the path. Waits up to two seconds for
+  // a lock.
   Result<EventPage> read(const EventQuery& query);
-  // Waits until something was written since the last read, or until the time is up; whether there is reason to read.
+  // Blocks until something was written since the last read, or until the time is up; whether there is reason to read.
+  // Without the system's watches it looks at least five times a second.
   bool waitForChange(std::chrono::milliseconds timeout);
 
  private:
+  // What tells one file at the path from the next.
   struct Identity {
     bool there = false;
     std::uint64_t device = 0;
@@ -69,24 +77,35 @@ class EventReader {
   };
 
   Identity identity() const;
+  // Of one that is read as it lies there any change makes another file of it.
   bool sameFile(const Identity& now) const noexcept;
+  // Whether the file is another, or somebody committed to it.
   bool changed();
+  // As a reader beside the writer, or as the file lies there.
   [[nodiscard]] Status open();
+  // Opens a name and reads from it once, as only that shows whether it can be read. Nothing that the file's schema says
+  // is carried out.
   [[nodiscard]] Status openAs(const std::string& name);
   void setBounds();  // of the read that begins
   Error lastError() const;
   Error about(const std::string& what) const { return {0, file_.string() + ": " + what}; }
+  // The id to read on after: less than what was asked for when the file began anew.
   std::int64_t startingPoint(std::int64_t after);
+  // In one transaction, which is over when it returns.
   Result<EventPage> readOpen(const EventQuery& query);
+  // The rows, within the bounds of this read.
   [[nodiscard]] Status readRows(const EventQuery& query, std::int64_t after, EventPage& page);
 
   const std::filesystem::path file_;
   Connection connection_;
+  // Of the folder, for waitForChange().
   ChangeWatch watch_;
   Identity opened_;
   bool asItLies_ = false;             // opened without locks and log
   std::optional<Identity> lastRead_;  // the file of the last rows, nothing before the first ones
+  // SQLite's word for the state that was read last; another number after somebody's commit.
   std::int64_t dataVersion_ = -1;
+  // Both of the read that goes on: SQLite asks for the first every thousand steps.
   std::int64_t stepsLeft_ = 0;  // of SQLite's machine
   std::int64_t textLeft_ = 0;   // bytes
 };

@@ -13,6 +13,8 @@ enum class Remedy : std::uint8_t {
   SetAside,  // the file can't be used: damaged, no database, or somebody else's; to be proven by a second look
 };
 
+// What helps against this code. An error that says nothing about the file (no memory, a read that failed) never sets
+// one aside.
 Remedy remedyFor(std::int64_t code) noexcept;
 
 }  // namespace tarn::recorder

@@ -19,9 +19,10 @@ class StateUsage {
   StateUsage(std::filesystem::path file, std::vector<std::filesystem::path> folders, std::int64_t cap)
       : file_(std::move(file)), folders_(std::move(folders)), cap_(cap) {}
 
-  // Looks at all of it and removes what is beyond the shares; the names of what was removed.
+  // Looks at all of it and removes what is beyond the shares (a fourth of the cap for files set aside, an eighth for
+  // each folder); the names of what was removed. A file that can't be removed is passed over, and counts.
   std::vector<std::string> tidy();
-  // What the database may take beside a log of this size.
+  // What the database may take beside a log of this size, as of the last tidy(); a fourth of the cap at the least.
   std::int64_t databaseBytes(std::int64_t logBytes) const noexcept;
 
  private:
@@ -31,7 +32,8 @@ class StateUsage {
   std::int64_t beside_ = 0;  // of all but the database and its log
 };
 
-// Which other processes keep the log's index of this database locked for reading: "1234 (name)" each.
+// Which other processes keep the log's index of this database locked for reading: "1234 (name)" each. Reads
+// /proc/locks, so it is for a line that is rare; processes of other namespaces aren't seen.
 std::vector<std::string> readersOf(const std::filesystem::path& database);
 
 }  // namespace tarn::recorder
