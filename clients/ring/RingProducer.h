@@ -15,7 +15,7 @@
 
 namespace tarn::ring {
 
-// What a gap record takes in the ring.
+// What a gap record takes in the ring; a multiple of 8 as it is.
 inline constexpr std::uint32_t kGapSize = TARNRING_RECORD_HEAD_BYTES + sizeof(tarnring_gap);
 
 // Where the content of a record goes: a cursor in the ring, given to whoever fills a record. What is put must be just
@@ -101,8 +101,6 @@ class RingProducer {
   std::uint64_t head() const noexcept { return head_; }
 
  private:
-  // What a gap record takes in the ring; a multiple of 8 as it is.
-
   // Where a position lies in the area, whose size is a power of two.
   std::byte* byteAt(std::uint64_t position) noexcept { return data_ + (position & (dataBytes_ - 1)); }
 
