@@ -78,7 +78,6 @@ class LateReplies {
     bool closed TARN_GUARDED_BY(mutex) = false;
   };
 
-  // Makes the queue when it is the first.
   void enqueue(platform::Work reply) TARN_REQUIRES(line_->mutex);
 
   platform::WorkQueues& workQueues_;

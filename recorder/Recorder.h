@@ -79,8 +79,7 @@ class Recorder {
   void shutdown();
 
   // Hands an event over, before start() too; `backend` must be a text that lives for ever, `time` is in epoch seconds.
-  // `name` is copied, the dictionaries are shared as they are now. Never blocks for the disk, never refuses; after
-  // shutdown() the event counts as failed. Threads: any.
+  // After shutdown() the event counts as failed. Threads: any.
   void record(std::string_view backend, std::string_view name, plist::Dictionary payload, plist::Dictionary detail,
               double time);
   // Whether events should not be brought in for now: too many wait, or the oldest for too long. A load or two, with a
@@ -103,7 +102,7 @@ class Recorder {
  private:
   using TimePoint = std::chrono::steady_clock::time_point;
 
-  // One that waits for a commit, in the order of the calls, which is that of the counts.
+  // One that waits for a commit.
   struct Settling {
     std::uint64_t handedOver;  // committed when so many are
     std::shared_ptr<platform::WorkQueue> queue;
@@ -138,7 +137,6 @@ class Recorder {
   bool hasRoom() const TARN_REQUIRES(mutex_);
   // So many are committed: the counts, those who wait, and the room handler where there is room again.
   void account(std::size_t events, std::size_t bytes) TARN_REQUIRES(mutex_);
-  // Hands over the work of those whose events are committed.
   void answerSettled() TARN_REQUIRES(mutex_);
   // The end: what waits counts as failed, and nobody is left waiting.
   void giveUp() TARN_REQUIRES(mutex_);

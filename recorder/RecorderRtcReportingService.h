@@ -54,6 +54,7 @@ class RecorderRtcReportingService final : public platform::RtcReportingService {
       const std::optional<std::vector<std::string>>& frameworksToCheck) override;
 
  private:
+  // The completions of starts; a session's calls, each recorded as it is made.
   class Completions;
   class Session;
 

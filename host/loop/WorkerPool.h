@@ -122,7 +122,6 @@ class WorkerPool {
   // Until somebody wakes it or the earliest moment comes.
   void sleep() TARN_REQUIRES(mutex_);
   void runSome(const std::shared_ptr<Line>& line) TARN_REQUIRES(mutex_);
-  // So many less; at the low mark the room handler is called, without the lock.
   void account(std::size_t finished) TARN_REQUIRES(mutex_);
 
   const platform::Clock& clock_;

@@ -29,7 +29,6 @@ class ReplyOutput {
   ReplyOutput(const ReplyOutput&) = delete;
   ReplyOutput& operator=(const ReplyOutput&) = delete;
 
-  // One reply each, in the order of the calls; nothing is sent yet. Not once it is broken.
   void append(std::uint64_t id, std::initializer_list<plist::ValueView> results);
   void append(const NumbersReply& reply);
   void append(std::uint64_t id, const platform::RemoteError& error);

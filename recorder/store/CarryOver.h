@@ -63,6 +63,7 @@ class CarryOver {
   std::int64_t lastToLookFor(std::int64_t known);
   // The next rows into some_; false when there are no more.
   bool readSome(double now);
+  // Keeps the row unless its checksum, or the kinds of its values, say that it isn't as it was written.
   void readRow(double now);
   // Those rows in one transaction, and what their ids tell of others that are missing.
   [[nodiscard]] Status writeSome(EventFile& into);

@@ -28,8 +28,7 @@ class EventBatch {
     plist::Dictionary detail;
   };
 
-  // Adds an event; returns the bytes that it is counted for: its place, its name and the memory of its dictionaries. A
-  // payload shared with the event before costs nothing more.
+  // Adds an event; returns the bytes that it is counted for. A payload shared with the event before costs nothing more.
   std::size_t add(std::string_view backend, std::string_view name, plist::Dictionary payload, plist::Dictionary detail,
                   double time);
   // Lets go of all events and keeps the room.

@@ -76,6 +76,7 @@ class EventReader {
     friend bool operator==(const Identity&, const Identity&) = default;
   };
 
+  // Of the file at the path now; asks the system, not the database.
   Identity identity() const;
   // Of one that is read as it lies there any change makes another file of it.
   bool sameFile(const Identity& now) const noexcept;
@@ -87,6 +88,7 @@ class EventReader {
   // is carried out.
   [[nodiscard]] Status openAs(const std::string& name);
   void setBounds();  // of the read that begins
+  // Why the connection's last call failed, or that the read cost too much.
   Error lastError() const;
   Error about(const std::string& what) const { return {0, file_.string() + ": " + what}; }
   // The id to read on after: less than what was asked for when the file began anew.

@@ -47,10 +47,12 @@ class HandOverPage {
   bool isTorn() const noexcept;
 
  private:
+  // What lies in the file.
   struct Page;
 
   void unmap() noexcept;
 
+  // Null while nothing is kept.
   Page* page_ = nullptr;
   std::uint64_t tornBefore_ = 0;
 };

@@ -77,6 +77,7 @@ class StoreCheck {
   Statement groups_;
   Statement rows_;
   EventGroup group_;
+  // Where goOn() goes on. Every id from the file's first up to here was looked at.
   std::int64_t next_ = 0;  // the id that must come next
   bool done_ = true;
   bool tolerant_ = false;

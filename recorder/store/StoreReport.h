@@ -1,5 +1,5 @@
 // StoreReport: whether a recorder's file is whole, looked at from outside: read-only, beside a running service or
-// without one. Threads: any.
+// without one. The same checks that the recorder itself makes, without its remedies: nothing is mended. Threads: any.
 #pragma once
 
 #include <cstdint>
