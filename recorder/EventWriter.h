@@ -71,7 +71,6 @@ class EventWriter {
   bool hasMoreToBringIn() const noexcept { return file_.isOpen() && file_.hasMoreToBringIn(); }
   // Events removed by retention since the start.
   std::uint64_t expired() const noexcept { return file_.expired(); }
-  // Why the last call failed, for the line that tells what was given up.
   const std::string& problem() const noexcept { return problem_; }
 
  private:

@@ -109,9 +109,7 @@ class Recorder {
     platform::Work done;
   };
 
-  // The writer thread, from start() to shutdown(). Takes turns: gather or pause, write, upkeep, a piece of the check.
   void run();
-  // Into the mapped file, by stores to memory: what a run after a kill is to find.
   void keepCounts() TARN_REQUIRES(mutex_);
   // Maps that file; without it nothing is counted along, and a kill costs an unknown number.
   void openCounts();
@@ -133,12 +131,10 @@ class Recorder {
   void noteUse() noexcept TARN_REQUIRES(mutex_);
   // Since when the oldest event waits, after some were committed.
   void noteOldest() TARN_REQUIRES(mutex_);
-  // Whether the low marks are reached and nothing waits for too long.
   bool hasRoom() const TARN_REQUIRES(mutex_);
   // So many are committed: the counts, those who wait, and the room handler where there is room again.
   void account(std::size_t events, std::size_t bytes) TARN_REQUIRES(mutex_);
   void answerSettled() TARN_REQUIRES(mutex_);
-  // The end: what waits counts as failed, and nobody is left waiting.
   void giveUp() TARN_REQUIRES(mutex_);
   bool hasWaiting() const noexcept TARN_REQUIRES(mutex_) { return committed_ + failed_ != handedOver_; }
   bool isAwaited() const noexcept TARN_REQUIRES(mutex_) { return committed_ < awaited_; }

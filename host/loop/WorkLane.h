@@ -43,9 +43,7 @@ class WorkLane {
     return current_ != nullptr && current_->queue_ == queue ? current_ : nullptr;
   }
 
-  // Nothing waits, the rest of a piece that gave way included.
   bool empty() const noexcept { return !rest_ && next_ == pieces_.size(); }
-  // At the end of what waits. Allocates now and then; the room is kept.
   void add(platform::Work work) { pieces_.push_back(std::move(work)); }
   // Ahead of what waits. One at a time: the piece that runs gives way once, as the last thing it does.
   void addNext(platform::Work rest) { rest_ = std::move(rest); }

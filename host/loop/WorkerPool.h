@@ -59,8 +59,8 @@ class WorkerPool {
   void setRoomHandler(RoomHandler handler) { roomHandler_ = std::move(handler); }
   // Starts the threads, once; later calls do nothing. A system that has no more threads to give ends the process.
   void start(std::size_t threads);
-  // Runs what is ready, then ends the threads and waits for them. What is delayed, what is suspended and what comes
-  // later is destroyed uncalled. Not for work of the pool, as it would wait for itself.
+  // Runs what is ready, then ends the threads. What is delayed, what is suspended and what comes later is destroyed
+  // uncalled.
   void stop();
 
   // Gathered: while a thread is about to look again by itself, which is within half a millisecond, nobody is woken.

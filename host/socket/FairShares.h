@@ -157,7 +157,6 @@ class FairShares {
   // The holder's turn, during which served() tells of it.
   ShareHolder::Turn serve(const ShareParty& party, ShareHolder& holder);
   void passOver();
-  // As of now: halved for each fading since it was written down.
   std::int64_t latelyOf(const ShareParty& party) const noexcept;
   void noteDone(ShareParty& party, std::int64_t cost) noexcept;
 
