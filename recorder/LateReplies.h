@@ -82,6 +82,7 @@ class LateReplies {
 
   platform::WorkQueues& workQueues_;
   const Manner manner_;
+  // The replies that wait; what is on the queue holds it, so it may outlive this.
   const std::shared_ptr<Line> line_ = std::make_shared<Line>();
   // Serial, so replies come one by one.
   std::shared_ptr<platform::WorkQueue> queue_ TARN_GUARDED_BY(line_->mutex);

@@ -126,6 +126,7 @@ class Recorder {
   bool writeCurrent() TARN_REQUIRES(mutex_);
   // Retention's next step, and when the one after it is due.
   bool maintain() TARN_REQUIRES(mutex_);
+  // The next piece of the check, and when the one after it is due.
   bool verify() TARN_REQUIRES(mutex_);
   // Sets what isFull() and isCrowded() tell, after an event came.
   void noteUse() noexcept TARN_REQUIRES(mutex_);
@@ -136,7 +137,9 @@ class Recorder {
   void account(std::size_t events, std::size_t bytes) TARN_REQUIRES(mutex_);
   void answerSettled() TARN_REQUIRES(mutex_);
   void giveUp() TARN_REQUIRES(mutex_);
+  // Whether anything handed over isn't accounted for yet.
   bool hasWaiting() const noexcept TARN_REQUIRES(mutex_) { return committed_ + failed_ != handedOver_; }
+  // Whether somebody waits for a commit: then it isn't put off for company.
   bool isAwaited() const noexcept TARN_REQUIRES(mutex_) { return committed_ < awaited_; }
 
   const RecorderOptions options_;
@@ -150,6 +153,7 @@ class Recorder {
   EventBatch current_;
   std::size_t position_ = 0;  // in current_: what stands before it is committed
   std::chrono::milliseconds retry_;
+  // When upkeep and the check are due next; at once in the beginning.
   TimePoint nextMaintenance_;
   TimePoint nextVerification_;
   TimePoint currentSince_;              // of the first event in current_
@@ -166,6 +170,7 @@ class Recorder {
   // Since the group that is being written was taken.
   EventBatch incoming_ TARN_GUARDED_BY(mutex_);
   TimePoint incomingSince_ TARN_GUARDED_BY(mutex_);
+  // As EventBatch counts them, of both batches.
   std::size_t waitingBytes_ TARN_GUARDED_BY(mutex_) = 0;
   std::uint64_t handedOver_ TARN_GUARDED_BY(mutex_) = 0;
   std::uint64_t committed_ TARN_GUARDED_BY(mutex_) = 0;

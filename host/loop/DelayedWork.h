@@ -54,6 +54,7 @@ class DelayedWork {
     std::uint64_t sequence;
     Item item;
   };
+  // The order of the heap, whose front is the earliest.
   static bool later(const Entry& a, const Entry& b) noexcept {
     return a.deadline != b.deadline ? a.deadline > b.deadline : a.sequence > b.sequence;
   }

@@ -75,15 +75,19 @@ class WorkLane {
   std::int64_t spent() const noexcept { return spent_; }
 
  private:
+  // The innermost scope's lane.
   static inline thread_local WorkLane* current_ = nullptr;
 
   const platform::WorkQueue* queue_;
   platform::Work rest_;  // of the piece that gave way
   // Taken from next_ on; emptied once all are taken, so it is a queue without moving anything.
   std::vector<platform::Work> pieces_;
+  // Of pieces_, the first that wasn't taken.
   std::size_t next_ = 0;
+  // Of the turn that runs, or of the last one: what it may cost and what it has cost so far.
   std::int64_t credit_ = 0;
   std::int64_t spent_ = 0;
+  // Its turn was ended early.
   bool ended_ = false;
 };
 

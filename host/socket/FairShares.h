@@ -88,6 +88,7 @@ class ShareHolder {
   friend class FairShares;
 
   const std::shared_ptr<ShareParty> party_;
+  // As its user's, of its own turns.
   std::int64_t credit_ = 0;
   bool queued_ = false;
 };
@@ -161,9 +162,11 @@ class FairShares {
   void noteDone(ShareParty& party, std::int64_t cost) noexcept;
 
   std::deque<std::shared_ptr<ShareParty>> parties_;  // the one whose visit it is comes first
+  // By uid, those that have connections and some that had; weak, as a user is there for its connections only.
   std::unordered_map<std::uint32_t, std::weak_ptr<ShareParty>> byUser_;
   const ShareParty* served_ = nullptr;
   std::int64_t lately_ = 0;  // of all users together
+  // Cost since the last fading, of which fading_ counts how many there were.
   std::int64_t sinceFading_ = 0;
   std::uint64_t fading_ = 0;
 };

@@ -34,6 +34,7 @@ class HalfFrames {
   using Moment = std::chrono::nanoseconds;
 
  private:
+  // A connection's half frame: who has it, since when, and how much.
   struct Entry {
     std::weak_ptr<Holder> holder;
     Moment begun;

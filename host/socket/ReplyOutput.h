@@ -57,6 +57,7 @@ class ReplyOutput {
   std::size_t sentBytes_ = 0;
   // In bytes_, whole or in part.
   std::uint64_t unsentReplies_ = 0;
+  // Nothing is sent any more, and nothing may be appended.
   bool broken_ = false;
   bool resetSeen_ = false;
 };

@@ -100,6 +100,8 @@ class SocketConnection final : public platform::Connection,
   // Does the next thing that is to be done, in this order: work of the lane, the held request, the next whole frame,
   // more bytes; whether there was one.
   bool serveNext();
+  // The next frame of those that are received; false when there is no whole one. A frame that is too long ends the
+  // connection.
   bool serveNextFrame();
   // Decodes one whole frame: a request, one that is answered with a refusal, or the end of the connection.
   void serveFrame(std::span<const std::byte> frame);
@@ -147,6 +149,7 @@ class SocketConnection final : public platform::Connection,
   Handler interruptionHandler_;
   Handler invalidationHandler_;
 
+  // What came in and is not served yet, and the work that was handed over for it.
   wire::FrameBuffer frames_;
   bool inputWaits_ = false;  // the socket may have bytes
   bool peerGone_ = false;    // nobody will read a reply
@@ -157,11 +160,13 @@ class SocketConnection final : public platform::Connection,
   std::optional<wire::DecodedRequest> heldRequest_;  // the head request while the gate is shut
   std::size_t heldBytes_ = 0;                        // of its frame
   std::string refusal_;                              // the answer to every request; empty: they are served
+  // What it takes of its user's share.
   QuotaUse use_;
   HalfFrames::Place halfFrame_;
   bool framesTaken_ = false;         // since the half frame was noted
   std::uint32_t watchedEvents_ = 0;  // 0: not watched at all
 
+  // What goes out; a flush that was asked for, and how often in a row it was put off.
   ReplyOutput output_;
   bool flushAsked_ = false;
   int flushesPutOff_ = 0;

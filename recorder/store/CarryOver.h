@@ -79,6 +79,7 @@ class CarryOver {
   EventGroup group_;
   // Read and not committed yet; kept over a failure of the fresh file.
   std::vector<Read> some_;
+  // In rising order, as far as it has come.
   std::vector<IdRange> lost_;
   // Of SQLite's machine: a tree that leads into itself ends with these.
   std::int64_t stepsLeft_ = 0;

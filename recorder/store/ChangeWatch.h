@@ -31,6 +31,7 @@ class ChangeWatch {
   void begin();
   bool takeNews();
 
+  // What is watched, and how the names begin that count.
   const std::string folder_;
   const std::string name_;
   // -1 while the system gives none; closed at the end.

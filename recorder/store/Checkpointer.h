@@ -48,9 +48,11 @@ class Checkpointer {
   Connection connection_;  // while busy_, the thread's
   Mutex mutex_;
   ConditionVariable changed_;
+  // A checkpoint is under way, or about to be.
   bool busy_ TARN_GUARDED_BY(mutex_) = false;
   // The last one, by anything but a reader in the way; told to the next begin() once.
   bool failed_ TARN_GUARDED_BY(mutex_) = false;
+  // Pages; see takeBroughtIn().
   int broughtIn_ TARN_GUARDED_BY(mutex_) = 0;
   bool stopping_ TARN_GUARDED_BY(mutex_) = false;
 };

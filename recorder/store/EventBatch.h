@@ -42,6 +42,7 @@ class EventBatch {
   std::size_t bytes() const noexcept { return bytes_; }
   // Valid until the next add(), as is its name.
   const Event& operator[](std::size_t index) const noexcept { return events_[index]; }
+  // Of an event of this batch.
   std::string_view name(const Event& event) const noexcept {
     return std::string_view(names_).substr(event.nameAt, event.nameSize);
   }
@@ -49,6 +50,7 @@ class EventBatch {
  private:
   // Names lie apart, as a text each would be an allocation each.
   std::vector<Event> events_;
+  // One after the other, in the events' order.
   std::string names_;
   std::size_t bytes_ = 0;
 };

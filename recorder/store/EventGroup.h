@@ -48,6 +48,7 @@ class EventGroup {
   std::int64_t size() const noexcept;
   std::int64_t end() const noexcept { return first_ + size(); }  // the id after the last one
   double seconds() const noexcept { return seconds_; }
+  // Whether it has a checksum of this id.
   bool holds(std::int64_t id) const noexcept { return id >= first_ && id < end(); }
   // Of an id that it holds.
   std::uint64_t hash(std::int64_t id) const noexcept;

@@ -54,6 +54,7 @@ class HandOverPage {
 
   // Null while nothing is kept.
   Page* page_ = nullptr;
+  // MappedGuard's count when the file was mapped.
   std::uint64_t tornBefore_ = 0;
 };
 

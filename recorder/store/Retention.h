@@ -65,6 +65,7 @@ class Retention {
   RetentionLimits limits_;
   // Between prepare() and finalize().
   Connection* connection_ = nullptr;
+  // Prepared once for each connection, as they run with every commit.
   Statement oldest_;
   Statement pageCount_;
   Statement freePages_;

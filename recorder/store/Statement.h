@@ -1,6 +1,8 @@
 // Statement: one prepared SQLite statement. Owner: whoever owns the connection, which must outlive it. Threads: those
 // of the connection.
 //
+//   prepare -> bind -> step (a row) ... step (done) -> reset -> bind -> ...      or, without rows: bind -> run
+//
 // Operations that can fail answer SQLite's result code; the text of a failure is the connection's.
 #pragma once
 
