@@ -115,8 +115,6 @@ class LinuxPlatform final : private platform::ProcessControl {
   plist::Dictionary status();
   // Once a turn, while the clients end: whether the last is gone and nothing waits any more.
   void lookForTheEnd();
-  // When that takes too long, on the deadline's thread: commits what the recorder holds and ends the process with
-  // status 0.
   void giveUpClients();
   // The end in its order: no client, no ping, the workers' queues as far as they get shorter, no trace, the recorder's
   // last commit, the log.
@@ -179,7 +177,6 @@ class LinuxPlatform final : private platform::ProcessControl {
   std::shared_ptr<SocketListener> listener_;
   platform::UniqueFunction<void()> clientsAreGone_;  // set while the clients' ends are served
   bool ending_ = false;
-  // Runs from endClients() until the loop's end.
   Deadline endDeadline_;
   const platform::Facilities facilities_;
 };

@@ -112,7 +112,6 @@ class EventWriter {
   std::unique_ptr<CarryOver> carrying_;  // out of a file that was set aside, while that isn't over
   std::optional<IdRange> missing_;       // to be noted
   std::string problem_;                  // of the last failure
-  // What was told already, so that each thing is told once.
   bool longLogTold_ = false;
   bool faulty_ = false;
   bool suspected_ = false;  // the file was found unusable once

@@ -137,7 +137,6 @@ class Recorder {
   void account(std::size_t events, std::size_t bytes) TARN_REQUIRES(mutex_);
   void answerSettled() TARN_REQUIRES(mutex_);
   void giveUp() TARN_REQUIRES(mutex_);
-  // Whether anything handed over isn't accounted for yet.
   bool hasWaiting() const noexcept TARN_REQUIRES(mutex_) { return committed_ + failed_ != handedOver_; }
   // Whether somebody waits for a commit: then it isn't put off for company.
   bool isAwaited() const noexcept TARN_REQUIRES(mutex_) { return committed_ < awaited_; }
@@ -153,7 +152,6 @@ class Recorder {
   EventBatch current_;
   std::size_t position_ = 0;  // in current_: what stands before it is committed
   std::chrono::milliseconds retry_;
-  // When upkeep and the check are due next; at once in the beginning.
   TimePoint nextMaintenance_;
   TimePoint nextVerification_;
   TimePoint currentSince_;              // of the first event in current_

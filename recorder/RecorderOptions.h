@@ -52,7 +52,7 @@ struct RecorderOptions {
   std::chrono::milliseconds verifyTime{5};
   std::chrono::milliseconds verifyRest{6 * 3'600'000};
 
-  // A log beyond this is told, with the readers that hold it up.
+  // A log beyond this is told, once each time, with the readers that hold it up; nothing else is done about it.
   std::int64_t longLogBytes = std::int64_t{64} << 20;
 
   // What tells this boot of the system from others; the kernel's own name for it when empty.

@@ -75,7 +75,6 @@ class WorkLane {
   std::int64_t spent() const noexcept { return spent_; }
 
  private:
-  // The innermost scope's lane.
   static inline thread_local WorkLane* current_ = nullptr;
 
   const platform::WorkQueue* queue_;

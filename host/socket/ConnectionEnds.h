@@ -56,8 +56,6 @@ class ConnectionEnds {
     platform::Work then;
   };
 
-  // The number of the end that began last; ends_ has those under way, waiting_ those who wait, in the order of the
-  // calls.
   Place last_ = 0;
   std::set<Place> ends_;
   std::deque<Waiting> waiting_;

@@ -88,7 +88,6 @@ class ShareHolder {
   friend class FairShares;
 
   const std::shared_ptr<ShareParty> party_;
-  // As its user's, of its own turns.
   std::int64_t credit_ = 0;
   bool queued_ = false;
 };
@@ -162,7 +161,6 @@ class FairShares {
   void noteDone(ShareParty& party, std::int64_t cost) noexcept;
 
   std::deque<std::shared_ptr<ShareParty>> parties_;  // the one whose visit it is comes first
-  // By uid, those that have connections and some that had; weak, as a user is there for its connections only.
   std::unordered_map<std::uint32_t, std::weak_ptr<ShareParty>> byUser_;
   const ShareParty* served_ = nullptr;
   std::int64_t lately_ = 0;  // of all users together

@@ -145,6 +145,7 @@ class SocketConnection final : public platform::Connection,
   // Only ever goes on to a later one.
   State state_ = State::Fresh;
 
+  // Until the end's handlers have run; null before setExportedObject() too.
   std::shared_ptr<platform::TarnReportingServiceProtocol> object_;
   Handler interruptionHandler_;
   Handler invalidationHandler_;

@@ -1,9 +1,12 @@
 // EventReader: reads what the recorder holds, while it is being written or when no service runs.
 //
-// Owner: a tool. Opens the file read-only and keeps no transaction open between two calls. A file in a directory that
-// can't be written to is read as it lies there when nobody else has it open. When the file is set aside or replaced,
-// the reader goes on with the new one. The file isn't trusted: whatever it holds, it stays as it is, and a read ends
-// with rows or an error after work that its bytes are worth. Threads: one at a time.
+// Owner: a tool. Opens the file read-only and keeps no transaction open between two calls, so it never holds the log up
+// for longer than one page. A file in a directory that can't be written to is read as it lies there when nobody else
+// has it open. When the file is set aside or replaced, the reader goes on with the new one. The file isn't trusted:
+// whatever it holds, it stays as it is, and a read ends with rows or an error after work that its bytes are worth.
+// Threads: one at a time.
+//
+//   read(after 0) -> rows, lookedUpTo -> read(after that) ... more is false -> waitForChange() -> read() ...
 #pragma once
 
 #include <chrono>
