@@ -71,6 +71,7 @@ class LateReplies {
     // The queue's work: calls the reply that has waited longest, if close() has left any.
     void answerNext();
 
+    // Held while a reply is taken out, not while it runs.
     Mutex mutex;
     ConditionVariable answered;
     std::deque<platform::Work> waiting TARN_GUARDED_BY(mutex);

@@ -142,6 +142,7 @@ class Recorder {
   bool isAwaited() const noexcept TARN_REQUIRES(mutex_) { return committed_ < awaited_; }
 
   const RecorderOptions options_;
+  // Set before start(), constant after it, but for the thread.
   RecorderLog log_;
   RoomHandler roomHandler_;
   std::thread thread_;
@@ -151,6 +152,7 @@ class Recorder {
   // The group that is being written; kept whole until all of it is committed, so a fault in the middle loses nothing.
   EventBatch current_;
   std::size_t position_ = 0;  // in current_: what stands before it is committed
+  // After the next fault.
   std::chrono::milliseconds retry_;
   TimePoint nextMaintenance_;
   TimePoint nextVerification_;

@@ -21,7 +21,8 @@ struct RecorderOptions {
   std::int64_t maxMegabytes = 256;
   std::vector<std::filesystem::path> folders;
   double maxAgeDays = 30;
-  // How often an idle recorder looks for events that have grown too old.
+  // How often an idle recorder looks for events that have grown too old. Ages are days, so a minute is soon enough; a
+  // busy one looks with each commit.
   std::chrono::milliseconds maintenanceInterval{60'000};
 
   // Commits: a group is written this long after its first event at the latest, earlier when nothing new has come for
@@ -36,7 +37,8 @@ struct RecorderOptions {
   std::size_t groupBytes = std::size_t{4} << 20;
 
   // Waiting events: from the high marks on isFull() is true, from three quarters of them on isCrowded(), until both low
-  // marks are reached. They are low enough for what waits to be written within the time that a crash may cost.
+  // marks are reached. They are low enough for what waits to be written within the time that a crash may cost; the low
+  // ones are half of them, so that those who stopped don't stop again at once.
   std::size_t highWaterEvents = 16'384;
   std::size_t lowWaterEvents = 8'192;
   std::size_t highWaterBytes = std::size_t{16} << 20;
@@ -58,7 +60,8 @@ struct RecorderOptions {
   // What tells this boot of the system from others; the kernel's own name for it when empty.
   std::string boot;
 
-  // After a fault the next try comes after the first pause, each further one after twice as long, up to the last.
+  // After a fault the next try comes after the first pause, each further one after twice as long, up to the last: a
+  // disk that comes back is found within a second, and one that doesn't costs next to nothing.
   std::chrono::milliseconds firstRetry{250};
   std::chrono::milliseconds lastRetry{1000};
   // How often a shutdown tries a disk that fails before what waits is given up, and the pause between two tries.

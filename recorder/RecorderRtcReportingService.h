@@ -60,6 +60,7 @@ class RecorderRtcReportingService final : public platform::RtcReportingService {
 
   Recorder& recorder_;
   const platform::Clock& clock_;
+  // Of the configuration.
   const bool available_;
   // Sessions hold it weakly: after the service's end a start is answered by nobody.
   const std::shared_ptr<Completions> completions_;

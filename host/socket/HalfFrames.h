@@ -98,6 +98,7 @@ class HalfFrames {
   const Moment longest_;
   const std::size_t maxBytes_;
   std::list<Entry> entries_;  // the one that has waited longest first
+  // Of all entries.
   std::size_t bytes_ = 0;
 };
 

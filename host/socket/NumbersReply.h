@@ -42,6 +42,7 @@ class NumbersReply {
   std::vector<std::int64_t> numbers_;
   // Numbers that are bytes already.
   std::size_t done_ = 0;
+  // Grows as it goes on.
   std::string encoded_;
 };
 

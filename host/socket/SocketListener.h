@@ -50,9 +50,11 @@ class SocketListener final : public platform::Listener,
 
   ConnectionHost& host_;
   ListenSocket socket_;
+  // The service; weak, as it may end before the listener.
   std::weak_ptr<platform::ListenerDelegate> delegate_;
   // Of the next connection; no number is given twice.
   std::uint64_t nextNumber_ = 1;
+  // The loop watches the socket.
   bool accepting_ = false;
   bool shortage_ = false;  // logged, and nobody was accepted since
 };

@@ -60,6 +60,7 @@ class TraceThread {
   ConditionVariable changed_;
   std::thread thread_ TARN_GUARDED_BY(mutex_);
   std::vector<Command> commands_ TARN_GUARDED_BY(mutex_);
+  // A buffer is half full, and nobody has looked since.
   bool mustDrain_ TARN_GUARDED_BY(mutex_) = false;
   bool ended_ TARN_GUARDED_BY(mutex_) = false;
 };

@@ -70,6 +70,7 @@ class CarryOver {
   // The notes, and the ids of the fresh file go on after the old one's.
   [[nodiscard]] Status finish(EventFile& into);
 
+  // Both as given.
   const std::filesystem::path from_;
   const std::optional<std::int64_t> upTo_;
   Connection connection_;

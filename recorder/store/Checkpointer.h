@@ -46,6 +46,7 @@ class Checkpointer {
 
   std::thread thread_;
   Connection connection_;  // while busy_, the thread's
+  // Not held during a checkpoint, so the writer is never kept waiting by one that it doesn't wait for.
   Mutex mutex_;
   ConditionVariable changed_;
   // A checkpoint is under way, or about to be.

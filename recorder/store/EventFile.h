@@ -47,6 +47,7 @@ class EventFile {
   // Opens the file, makes it and its folders when there is none, checks it through (once a file, which reads all of
   // it). After an error it is closed.
   [[nodiscard]] Status open();
+  // Whether begin() makes sense; it isn't after any fault that closed the file.
   bool isOpen() const noexcept { return connection_.isOpen(); }
   // Closes; when all is well the write-ahead log is brought in and removed, so that a copy of the one file is whole.
   void close() noexcept;
@@ -156,6 +157,7 @@ class EventFile {
   Statement keepLastId_;
   Statement commit_;
   Statement insertGroup_;
+  // What runs inside the transactions, on this connection.
   Retention retention_;
   StoreCheck check_{connection_};
   RecorderTime time_;

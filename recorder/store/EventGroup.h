@@ -57,6 +57,7 @@ class EventGroup {
   // Over what the row says of itself.
   std::uint64_t ownHash() const noexcept;
 
+  // What one row of the table says: its first id, its time, and eight bytes for each event.
   std::int64_t first_ = 0;
   double seconds_ = 0;
   std::string bytes_;  // of the events' checksums

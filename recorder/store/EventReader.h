@@ -93,6 +93,7 @@ class EventReader {
   void setBounds();  // of the read that begins
   // Why the connection's last call failed, or that the read cost too much.
   Error lastError() const;
+  // Every error names the file.
   Error about(const std::string& what) const { return {0, file_.string() + ": " + what}; }
   // The id to read on after: less than what was asked for when the file began anew.
   std::int64_t startingPoint(std::int64_t after);
@@ -102,9 +103,11 @@ class EventReader {
   [[nodiscard]] Status readRows(const EventQuery& query, std::int64_t after, EventPage& page);
 
   const std::filesystem::path file_;
+  // Open from one read to the next, as long as the file stays the same.
   Connection connection_;
   // Of the folder, for waitForChange().
   ChangeWatch watch_;
+  // Of the file that is open, as it was then.
   Identity opened_;
   bool asItLies_ = false;             // opened without locks and log
   std::optional<Identity> lastRead_;  // the file of the last rows, nothing before the first ones

@@ -74,6 +74,7 @@ class Retention {
   Statement removeGroups_;
   Statement removeLosses_;
   Statement keepHoldsAfter_;
+  // Of a page of the database, as prepare() found it.
   std::int64_t pageBytes_ = 0;
   bool hasMore_ = false;
 };
