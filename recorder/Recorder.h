@@ -142,7 +142,6 @@ class Recorder {
   bool isAwaited() const noexcept TARN_REQUIRES(mutex_) { return committed_ < awaited_; }
 
   const RecorderOptions options_;
-  // Set before start(), constant after it, but for the thread.
   RecorderLog log_;
   RoomHandler roomHandler_;
   std::thread thread_;

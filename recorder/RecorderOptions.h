@@ -37,8 +37,7 @@ struct RecorderOptions {
   std::size_t groupBytes = std::size_t{4} << 20;
 
   // Waiting events: from the high marks on isFull() is true, from three quarters of them on isCrowded(), until both low
-  // marks are reached. They are low enough for what waits to be written within the time that a crash may cost; the low
-  // ones are half of them, so that those who stopped don't stop again at once.
+  // marks are reached. They are low enough for what waits to be written within the time that a crash may cost.
   std::size_t highWaterEvents = 16'384;
   std::size_t lowWaterEvents = 8'192;
   std::size_t highWaterBytes = std::size_t{16} << 20;
