@@ -1,8 +1,8 @@
 // QueueProgress: what the server queue's thread tells the watchdog about itself.
 //
 // Owned by the MainLoop. Written by the queue's thread alone, with no more than a relaxed store a step, which costs
-// less than an atomic addition; read by the watchdog's thread at any time. The members are told apart in time only
-// roughly: the watchdog's samples lie far apart.
+// less than an atomic addition; read by the watchdog's thread at any time. That is exact enough, as the watchdog's
+// samples lie far apart.
 #pragma once
 
 #include <atomic>
