@@ -28,7 +28,7 @@ struct ServiceOptions {
   // One that is named must be there.
   std::optional<std::string> configurationFile;
   std::string defaultConfigurationFile;  // read when none is named and it is there
-  // Nothing: a device without any property that is told.
+  // Nothing: the device has neither of the known properties.
   std::optional<std::string> devicePropertiesFile;
   // What is logged, from this level on, and where: "stderr", "journal" or a file's path.
   platform::LogLevel logLevel = platform::LogLevel::Default;
