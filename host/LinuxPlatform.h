@@ -113,11 +113,13 @@ class LinuxPlatform final : private platform::ProcessControl {
   platform::Facilities facilitiesOf();
   // The ledger with the recorder's and the service's counts, what waits on all queues, and the quotas.
   plist::Dictionary status();
+  // Once a turn, while the clients end: whether the last is gone and nothing waits any more.
   void lookForTheEnd();
   void giveUpClients();
   // The end in its order: no client, no ping, the workers' queues as far as they get shorter, no trace, the recorder's
   // last commit, the log.
   void end();
+  // Lets the workers' queues finish, as long as they get shorter; what is left is told.
   void settleQueues();
 
   // Constant from the making on.
@@ -130,11 +132,14 @@ class LinuxPlatform final : private platform::ProcessControl {
   platform::UniqueFunction<void()> settleLog_;
   // What stands between clients and the service.
   MainLoop loop_;
+  // Outlives the listener, and with it every connection.
   ConnectionHost connections_;
   const bool recorderEnabled_;  // false: it never starts, and no stand-in is handed out
+  // Outlives the stand-ins below, which record into it.
   recorder::Recorder recorder_;
   // The queues, and the stand-ins for the back-ends that answer on them.
   LinuxWorkQueues workQueues_;
+  // The stand-ins for the back-ends, each recording under its own name.
   LinuxRandomSource randomSource_;
   recorder::RecorderTallyService tally_;
   NoTallyService noTally_;
@@ -148,11 +153,14 @@ class LinuxPlatform final : private platform::ProcessControl {
   LinuxConditions conditions_;
   JsonDefaultsStore defaults_;
   const std::shared_ptr<FileNotificationCenter> notifications_;
+  // What reports ask of the machine.
   LinuxProcessFacts processFacts_;
   LinuxFileSystem fileSystem_;
+  // The driver report channels: the sources, then the service that offers them.
   FlumeFiles flumeFiles_;
   std::optional<AlsaFlume> alsaFlume_;  // of a device that is told where its sound hardware is
   LinuxFlumeService flume_;
+  // Performance traces, from the signposts to their analysis.
   LinuxSignposts signposts_;
   LinuxTracePoints tracePoints_;
   LinuxPerformanceTraceService performanceTrace_;
@@ -164,6 +172,7 @@ class LinuxPlatform final : private platform::ProcessControl {
   JsonDeviceProperties deviceProperties_;
   // The service's life.
   Watchdog watchdog_;
+  // From listen() on.
   ServiceCount serviceCounts_;
   std::shared_ptr<SocketListener> listener_;
   platform::UniqueFunction<void()> clientsAreGone_;  // set while the clients' ends are served

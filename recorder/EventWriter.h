@@ -71,7 +71,6 @@ class EventWriter {
   bool hasMoreToBringIn() const noexcept { return file_.isOpen() && file_.hasMoreToBringIn(); }
   // Events removed by retention since the start.
   std::uint64_t expired() const noexcept { return file_.expired(); }
-  // Why the last call failed, for the line that tells what was given up.
   const std::string& problem() const noexcept { return problem_; }
 
  private:
@@ -101,12 +100,14 @@ class EventWriter {
   const RecorderOptions& options_;
   const platform::Clock& clock_;
   RecorderLog log_;
+  // What it writes to, and what else lies beside that under the same cap.
   EventFile file_;
   StateUsage usage_;
   plist::Dictionary lastPayload_;  // whose text payloadText_ is
   std::string payloadText_ = "{}";
   // Kept for its room.
   std::string detailText_;
+  // Of the fault that lasts, on the monotonic clock.
   std::chrono::nanoseconds faultSince_{0};
   std::unique_ptr<CarryOver> carrying_;  // out of a file that was set aside, while that isn't over
   std::optional<IdRange> missing_;       // to be noted

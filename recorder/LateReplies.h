@@ -71,6 +71,7 @@ class LateReplies {
     // The queue's work: calls the reply that has waited longest, if close() has left any.
     void answerNext();
 
+    // Held while a reply is taken out, not while it runs.
     Mutex mutex;
     ConditionVariable answered;
     std::deque<platform::Work> waiting TARN_GUARDED_BY(mutex);
@@ -78,11 +79,11 @@ class LateReplies {
     bool closed TARN_GUARDED_BY(mutex) = false;
   };
 
-  // Makes the queue when it is the first.
   void enqueue(platform::Work reply) TARN_REQUIRES(line_->mutex);
 
   platform::WorkQueues& workQueues_;
   const Manner manner_;
+  // The replies that wait; what is on the queue holds it, so it may outlive this.
   const std::shared_ptr<Line> line_ = std::make_shared<Line>();
   // Serial, so replies come one by one.
   std::shared_ptr<platform::WorkQueue> queue_ TARN_GUARDED_BY(line_->mutex);

@@ -79,8 +79,7 @@ class Recorder {
   void shutdown();
 
   // Hands an event over, before start() too; `backend` must be a text that lives for ever, `time` is in epoch seconds.
-  // `name` is copied, the dictionaries are shared as they are now. Never blocks for the disk, never refuses; after
-  // shutdown() the event counts as failed. Threads: any.
+  // After shutdown() the event counts as failed. Threads: any.
   void record(std::string_view backend, std::string_view name, plist::Dictionary payload, plist::Dictionary detail,
               double time);
   // Whether events should not be brought in for now: too many wait, or the oldest for too long. A load or two, with a
@@ -103,16 +102,14 @@ class Recorder {
  private:
   using TimePoint = std::chrono::steady_clock::time_point;
 
-  // One that waits for a commit, in the order of the calls, which is that of the counts.
+  // One that waits for a commit.
   struct Settling {
     std::uint64_t handedOver;  // committed when so many are
     std::shared_ptr<platform::WorkQueue> queue;
     platform::Work done;
   };
 
-  // The writer thread, from start() to shutdown(). Takes turns: gather or pause, write, upkeep, a piece of the check.
   void run();
-  // Into the mapped file, by stores to memory: what a run after a kill is to find.
   void keepCounts() TARN_REQUIRES(mutex_);
   // Maps that file; without it nothing is counted along, and a kill costs an unknown number.
   void openCounts();
@@ -129,20 +126,19 @@ class Recorder {
   bool writeCurrent() TARN_REQUIRES(mutex_);
   // Retention's next step, and when the one after it is due.
   bool maintain() TARN_REQUIRES(mutex_);
+  // The next piece of the check, and when the one after it is due.
   bool verify() TARN_REQUIRES(mutex_);
   // Sets what isFull() and isCrowded() tell, after an event came.
   void noteUse() noexcept TARN_REQUIRES(mutex_);
   // Since when the oldest event waits, after some were committed.
   void noteOldest() TARN_REQUIRES(mutex_);
-  // Whether the low marks are reached and nothing waits for too long.
   bool hasRoom() const TARN_REQUIRES(mutex_);
   // So many are committed: the counts, those who wait, and the room handler where there is room again.
   void account(std::size_t events, std::size_t bytes) TARN_REQUIRES(mutex_);
-  // Hands over the work of those whose events are committed.
   void answerSettled() TARN_REQUIRES(mutex_);
-  // The end: what waits counts as failed, and nobody is left waiting.
   void giveUp() TARN_REQUIRES(mutex_);
   bool hasWaiting() const noexcept TARN_REQUIRES(mutex_) { return committed_ + failed_ != handedOver_; }
+  // Whether somebody waits for a commit: then it isn't put off for company.
   bool isAwaited() const noexcept TARN_REQUIRES(mutex_) { return committed_ < awaited_; }
 
   const RecorderOptions options_;
@@ -155,6 +151,7 @@ class Recorder {
   // The group that is being written; kept whole until all of it is committed, so a fault in the middle loses nothing.
   EventBatch current_;
   std::size_t position_ = 0;  // in current_: what stands before it is committed
+  // After the next fault.
   std::chrono::milliseconds retry_;
   TimePoint nextMaintenance_;
   TimePoint nextVerification_;
@@ -172,6 +169,7 @@ class Recorder {
   // Since the group that is being written was taken.
   EventBatch incoming_ TARN_GUARDED_BY(mutex_);
   TimePoint incomingSince_ TARN_GUARDED_BY(mutex_);
+  // As EventBatch counts them, of both batches.
   std::size_t waitingBytes_ TARN_GUARDED_BY(mutex_) = 0;
   std::uint64_t handedOver_ TARN_GUARDED_BY(mutex_) = 0;
   std::uint64_t committed_ TARN_GUARDED_BY(mutex_) = 0;

@@ -22,6 +22,7 @@ class RecorderLog {
   void notice(std::string_view text, int line = __builtin_LINE()) noexcept;
 
  private:
+  // Nothing below the log's threshold, which costs one load.
   void write(platform::LogLevel level, std::string_view text, int line) noexcept;
 
   platform::Log& log_;

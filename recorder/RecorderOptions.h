@@ -21,7 +21,8 @@ struct RecorderOptions {
   std::int64_t maxMegabytes = 256;
   std::vector<std::filesystem::path> folders;
   double maxAgeDays = 30;
-  // How often an idle recorder looks for events that have grown too old.
+  // How often an idle recorder looks for events that have grown too old. Ages are days, so a minute is soon enough; a
+  // busy one looks with each commit.
   std::chrono::milliseconds maintenanceInterval{60'000};
 
   // Commits: a group is written this long after its first event at the latest, earlier when nothing new has come for
@@ -52,13 +53,14 @@ struct RecorderOptions {
   std::chrono::milliseconds verifyTime{5};
   std::chrono::milliseconds verifyRest{6 * 3'600'000};
 
-  // A log beyond this is told, with the readers that hold it up.
+  // A log beyond this is told, once each time, with the readers that hold it up; nothing else is done about it.
   std::int64_t longLogBytes = std::int64_t{64} << 20;
 
   // What tells this boot of the system from others; the kernel's own name for it when empty.
   std::string boot;
 
-  // After a fault the next try comes after the first pause, each further one after twice as long, up to the last.
+  // After a fault the next try comes after the first pause, each further one after twice as long, up to the last: a
+  // disk that comes back is found within a second, and one that doesn't costs next to nothing.
   std::chrono::milliseconds firstRetry{250};
   std::chrono::milliseconds lastRetry{1000};
   // How often a shutdown tries a disk that fails before what waits is given up, and the pause between two tries.

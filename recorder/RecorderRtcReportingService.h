@@ -54,11 +54,13 @@ class RecorderRtcReportingService final : public platform::RtcReportingService {
       const std::optional<std::vector<std::string>>& frameworksToCheck) override;
 
  private:
+  // The completions of starts; a session's calls, each recorded as it is made.
   class Completions;
   class Session;
 
   Recorder& recorder_;
   const platform::Clock& clock_;
+  // Of the configuration.
   const bool available_;
   // Sessions hold it weakly: after the service's end a start is answered by nobody.
   const std::shared_ptr<Completions> completions_;

@@ -41,6 +41,7 @@ class RecorderSnareService : public platform::SnareService {
   std::shared_ptr<platform::SnareReporter> createReporter() override;
 
  private:
+  // Takes and answers requests, for the service and for reporters that outlive it.
   class Intake;
   class Reporter;
 

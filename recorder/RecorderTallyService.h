@@ -47,6 +47,7 @@ class RecorderTallyService : public platform::TallyService {
 
   Recorder& recorder_;
   const platform::Clock& clock_;
+  // As the configuration has them; they don't change.
   const std::vector<std::string> inUse_;
   const bool all_;  // one of the patterns is "*"
   // Name, and whether it is in use. Of the server queue alone, so without a lock.

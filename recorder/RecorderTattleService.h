@@ -32,6 +32,7 @@ class RecorderTattleService : public platform::TattleService {
  private:
   Recorder& recorder_;
   const platform::Clock& clock_;
+  // One after the other, in the order of the requests.
   LateReplies completions_;
 };
 

@@ -19,6 +19,7 @@ struct FlumeNameOrder {
   }
 };
 
+// Names to channels, both of the samples that were added.
 using FlumeChannelIndex = std::map<const platform::FlumeChannelName*, const platform::FlumeChannel*, FlumeNameOrder>;
 
 // Adds all channels of a sample. Of channels that are known alike the first is found, also over several calls.

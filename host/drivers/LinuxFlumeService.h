@@ -40,6 +40,7 @@ class LinuxFlumeService final : public platform::FlumeService {
                             const std::shared_ptr<const platform::FlumeSamples>& later) override;
 
  private:
+  // Not owned.
   const std::vector<FlumeSource*> sources_;
 };
 

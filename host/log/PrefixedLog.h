@@ -1,5 +1,8 @@
 // logPrefixed: the log lines of the host's own parts (loop, listener, connections) in the form of all others: the text
 // stands after the prefix "%25s:%-5d " (module, line). Threads: any.
+//
+// An entry below the log's threshold costs one load. `module` names the part that speaks and is a text of the program,
+// as the flood guard keeps it; `line` is the caller's own, by the default argument.
 #pragma once
 
 #include <string>
@@ -19,9 +22,6 @@ inline constexpr platform::LogCategory kDriverCategory{"sys.oxbow.tarnkit", "tar
 // The performance traces and their analysis.
 inline constexpr platform::LogCategory kTraceCategory{"sys.oxbow.tarnkit", "tarnrt"};
 
-// Forms and writes one entry unless it is below the log's threshold, which costs one load. `module` names the part that
-// speaks and is a text of the program, as the flood guard keeps it; `line` is the caller's own, by the default
-// argument.
 void logPrefixed(platform::Log& log, const platform::LogCategory& category, platform::LogLevel level,
                  std::string_view module, std::string_view text, int line = __builtin_LINE());
 

@@ -22,6 +22,7 @@ class CurrentQueue {
   static bool is(const void* queue) noexcept { return current_ == queue; }
 
  private:
+  // Null while the thread runs no queue's work.
   static inline thread_local const void* current_ = nullptr;
   const void* previous_;
 };

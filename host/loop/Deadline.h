@@ -20,8 +20,7 @@ class Deadline {
 
   // To be called once.
   void start(std::chrono::milliseconds after, platform::UniqueFunction<void()> isOver);
-  // What wasn't called by now never is; what is being called is waited for, however long it takes. Safe before start()
-  // and a second time.
+  // What wasn't called by now never is; what is being called is waited for.
   void cancel();
 
  private:

@@ -33,7 +33,6 @@ class DelayedWork {
   bool empty() const noexcept { return heap_.empty(); }
   // Of the earliest; only when there is one.
   std::chrono::nanoseconds deadline() const noexcept { return heap_.front().deadline; }
-  // Whether take() gives something whose moment has come.
   bool due(std::chrono::nanoseconds now) const noexcept { return !heap_.empty() && heap_.front().deadline <= now; }
   // How many moments have come. A walk over all that waits, so it is for reports and not for each turn.
   std::size_t dueCount(std::chrono::nanoseconds now) const noexcept {
@@ -55,6 +54,7 @@ class DelayedWork {
     std::uint64_t sequence;
     Item item;
   };
+  // The order of the heap, whose front is the earliest.
   static bool later(const Entry& a, const Entry& b) noexcept {
     return a.deadline != b.deadline ? a.deadline > b.deadline : a.sequence > b.sequence;
   }

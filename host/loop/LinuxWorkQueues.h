@@ -46,7 +46,9 @@ class LinuxWorkQueues final : public platform::WorkQueues {
   [[nodiscard]] bool settle(std::chrono::nanoseconds longest) { return pool_->settle(longest); }
 
  private:
+  // Handed out by name; made and served by the main loop.
   std::shared_ptr<platform::WorkQueue> serverQueue_;
+  // Shared with the queues, which may outlive this.
   std::shared_ptr<WorkerPool> pool_;
 };
 

@@ -30,8 +30,8 @@
 
 namespace tarn::linux_host {
 
-// What the loop calls: a listener, a connection, the signals. Held by the loop while a descriptor of it is
-// watched or a flush is due, so it may let go of itself in the middle of a call. Only ever called on the loop's thread.
+// What the loop calls: a listener, a connection, the signals. Held by the loop while a descriptor of it is watched or a
+// flush is due, so it may let go of itself in the middle of a call. Only ever called on the loop's thread.
 class EventHandler {
  public:
   virtual ~EventHandler() = default;

@@ -1,8 +1,8 @@
 // QueueProgress: what the server queue's thread tells the watchdog about itself.
 //
 // Owned by the MainLoop. Written by the queue's thread alone, with no more than a relaxed store a step, which costs
-// less than an atomic addition; read by the watchdog's thread at any time. The members are told apart in time only
-// roughly: the watchdog's samples lie far apart.
+// less than an atomic addition; read by the watchdog's thread at any time. That is exact enough, as the watchdog's
+// samples lie far apart.
 #pragma once
 
 #include <atomic>
@@ -39,6 +39,7 @@ class QueueProgress {
     waitingSince_.store(kNotWaiting, std::memory_order_relaxed);
   }
 
+  // From any thread, without stopping anybody: the members may be of moments that lie a step apart.
   Sample sample() const noexcept {
     Sample sample;
     sample.steps = steps_.load(std::memory_order_relaxed);
@@ -54,9 +55,11 @@ class QueueProgress {
   // A moment that no clock tells, so that a load is enough to know both whether and since when.
   static constexpr std::int64_t kNotWaiting = INT64_MIN;
 
+  // Each has one writer, so a load and a store do where others would need an addition.
   std::atomic<std::uint64_t> steps_{0};
   std::atomic<std::uint64_t> turns_{0};
   std::atomic<bool> idle_{false};
+  // Nanoseconds of the monotonic clock.
   std::atomic<std::int64_t> waitingSince_{kNotWaiting};
 };
 

@@ -39,8 +39,7 @@ class ServerQueue final : public platform::WorkQueue {
   ServerQueue& operator=(const ServerQueue&) = delete;
 
   // Within a lane's scope on the serving thread the work goes to that lane, else to the list, with the client on whose
-  // behalf the caller works. Takes a lock; writes the wake descriptor when the server sleeps. May allocate, never
-  // refuses.
+  // behalf the caller works. Takes a lock; writes the wake descriptor when the server sleeps.
   void async(platform::Work work) override;
   // From its moment on the piece is like others of the list, and nobody's: it has neither lane nor client, even when a
   // client's work asked for it. Without a delay it is async(). Wakes the server only when it would have slept past the

@@ -34,6 +34,7 @@ class SignalSource final : public EventHandler {
  private:
   // A signalfd, from start() on.
   UniqueDescriptor descriptor_;
+  // From start() on, for the life of the process.
   Handler handler_;
 };
 

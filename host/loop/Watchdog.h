@@ -64,6 +64,7 @@ class Watchdog {
   Mutex mutex_;
   ConditionVariable changed_;
   bool stopping_ TARN_GUARDED_BY(mutex_) = false;
+  // Only when the manager asked.
   std::thread thread_;
 };
 

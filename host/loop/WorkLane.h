@@ -43,9 +43,7 @@ class WorkLane {
     return current_ != nullptr && current_->queue_ == queue ? current_ : nullptr;
   }
 
-  // Nothing waits, the rest of a piece that gave way included.
   bool empty() const noexcept { return !rest_ && next_ == pieces_.size(); }
-  // At the end of what waits. Allocates now and then; the room is kept.
   void add(platform::Work work) { pieces_.push_back(std::move(work)); }
   // Ahead of what waits. One at a time: the piece that runs gives way once, as the last thing it does.
   void addNext(platform::Work rest) { rest_ = std::move(rest); }
@@ -83,9 +81,12 @@ class WorkLane {
   platform::Work rest_;  // of the piece that gave way
   // Taken from next_ on; emptied once all are taken, so it is a queue without moving anything.
   std::vector<platform::Work> pieces_;
+  // Of pieces_, the first that wasn't taken.
   std::size_t next_ = 0;
+  // Of the turn that runs, or of the last one: what it may cost and what it has cost so far.
   std::int64_t credit_ = 0;
   std::int64_t spent_ = 0;
+  // Its turn was ended early.
   bool ended_ = false;
 };
 

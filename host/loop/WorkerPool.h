@@ -59,14 +59,14 @@ class WorkerPool {
   void setRoomHandler(RoomHandler handler) { roomHandler_ = std::move(handler); }
   // Starts the threads, once; later calls do nothing. A system that has no more threads to give ends the process.
   void start(std::size_t threads);
-  // Runs what is ready, then ends the threads and waits for them. What is delayed, what is suspended and what comes
-  // later is destroyed uncalled. Not for work of the pool, as it would wait for itself.
+  // Runs what is ready, then ends the threads. What is delayed, what is suspended and what comes later is destroyed
+  // uncalled.
   void stop();
 
   // Gathered: while a thread is about to look again by itself, which is within half a millisecond, nobody is woken.
   // AtOnce: that look happens now.
   enum class Urgency { Gathered, AtOnce };
-  // Runs `work` as that of this line, after what the line was given before. Allocates; never refuses before stop().
+  // Runs `work` as that of this line, after what the line was given before.
   void add(const std::shared_ptr<Line>& line, platform::Work work, Urgency urgency = Urgency::Gathered);
   // Hands it over once `delay` has passed, not before; at once without one. It counts as unfinished from its moment on.
   void addAfter(const std::shared_ptr<Line>& line, std::chrono::nanoseconds delay, platform::Work work);
@@ -85,8 +85,8 @@ class WorkerPool {
   std::size_t unfinished() const;
   // One load, for each request.
   bool isFull() const noexcept { return full_.load(std::memory_order_relaxed); }
-  // Calls `done` once all that is unfinished now is finished, on a thread of the pool or at once on the caller's. What
-  // comes later isn't waited for. It is destroyed uncalled with work that is.
+  // Calls `done` once all that is unfinished now is finished, on a thread of the pool or at once on the caller's. It is
+  // destroyed uncalled with work that is.
   void afterWhatIsUnfinished(platform::Work done);
   // Blocks until nothing is unfinished; false when `longest` (an hour at most) passed first. Not for work of the pool.
   [[nodiscard]] bool settle(std::chrono::nanoseconds longest);
@@ -122,7 +122,6 @@ class WorkerPool {
   // Until somebody wakes it or the earliest moment comes.
   void sleep() TARN_REQUIRES(mutex_);
   void runSome(const std::shared_ptr<Line>& line) TARN_REQUIRES(mutex_);
-  // So many less; at the low mark the room handler is called, without the lock.
   void account(std::size_t finished) TARN_REQUIRES(mutex_);
 
   const platform::Clock& clock_;

@@ -92,7 +92,6 @@ class ConnectionRings : public std::enable_shared_from_this<ConnectionRings> {
   bool serveRing(RingReader& reader, std::size_t& share);
   Step serveRecord(RingReader& reader, RingOwner& owner, std::size_t& share);
   Step serveMessage(RingReader& reader, RingOwner& owner, std::span<const std::byte> content);
-  // A request as on the wire. declareShape is done here; other operations of the host have no place in a ring.
   Step serveFrame(RingReader& reader, RingOwner& owner, std::span<const std::byte> content);
   Step refuseRecord(RingReader& reader, tarnring_refusal reason);
   void close(RingReader& reader);

@@ -37,7 +37,7 @@ class RingBoard {
   // counts as committed once it is taken. Before the first connection.
   void setCommitSource(CommitSource source) { commits_ = std::move(source); }
 
-  // The rings of a new connection; it costs nothing until one is opened. Walks over the connections, once each.
+  // The rings of a connection, made with its first request about one. Also forgets the connections that are gone.
   std::shared_ptr<ConnectionRings> connect(std::weak_ptr<RingOwner> owner);
 
   // For the connections: how far the recorder is now.

@@ -39,6 +39,7 @@ struct RingCounts {
   std::uint64_t droppedByClients = 0;
   // Records by reason; the ring went on after each.
   std::array<std::uint64_t, kRingRefusals> refused{};
+  // Rings that were refused, or closed, by reason.
   std::array<std::uint64_t, kRingFaults> faults{};
 
   // One more of this kind; a fault of an open ring counts here too.

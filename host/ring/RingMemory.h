@@ -51,11 +51,13 @@ class RingMemory {
   // Bytes of the area behind the header, as the file's size said when it was mapped; the header's own number isn't
   // used.
   std::uint32_t dataBytes() const noexcept { return dataBytes_; }
+  // Of the file that is mapped.
   const RingIdentity& identity() const noexcept { return identity_; }
 
  private:
   void swap(RingMemory& other) noexcept;
 
+  // Null before map(); header and data area behind it.
   void* mapping_ = nullptr;
   std::uint32_t dataBytes_ = 0;
   RingIdentity identity_;

@@ -45,6 +45,7 @@ class RingReader final : public EventHandler {
   // Calls the wake handler; which events there were doesn't matter.
   void handleEvents(std::uint32_t events) override;
 
+  // The reading itself; what it gives was copied out of the shared memory.
   ring::RingConsumer<>& consumer() noexcept { return consumer_; }
   const RingIdentity& identity() const noexcept { return memory_.identity(); }
   // That the mapping takes, header included.

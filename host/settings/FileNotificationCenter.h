@@ -85,8 +85,10 @@ class FileNotificationCenter final : public platform::NotificationCenter,
   const NotificationFolder folder_;
   MainLoop& loop_;
   platform::Log& log_;
+  // By token; tokens are never given twice.
   std::map<std::int32_t, std::shared_ptr<Entry>> entries_;
   std::int32_t lastToken_ = 0;
+  // The kernel's queue of changes, from the first registration on.
   UniqueDescriptor events_;
   bool watched_ = false;  // the loop watches events_: from the first registration on
   int watch_ = -1;        // negative while the folder can't be watched

@@ -44,6 +44,7 @@ struct HostConfiguration {
   tarn::recorder::RecorderRtcReportingService::Behaviour rtc;
   Snare snare;
   Paths paths;
+  // [recorder]: whether there is one, and what it keeps.
   bool recorderEnabled = true;  // false: nothing stands in for the back-ends, and nothing is recorded
   tarn::recorder::RecorderOptions recorder;
   // [limits]: those of the host's bounds that an operator may set; the others keep their constants.
@@ -56,7 +57,8 @@ struct HostConfiguration {
 // the one that stands first in the file; or "NAME: why it can't be read". Then the defaults stand beside it. A file
 // that isn't there is such an error: who may do without one asks first.
 Result<HostConfiguration> readConfiguration(const std::string& path);
-// The same of a text that is in memory; `name` stands for the file in errors.
+// The same of a text that is in memory; `name` stands for the file in errors. No file is looked at, nor are those that
+// settings name.
 Result<HostConfiguration> parseConfiguration(std::string_view text, std::string_view name);
 
 }  // namespace tarn::linux_host

@@ -83,6 +83,7 @@ class JsonDefaultsStore final : public platform::DefaultsStore {
     Status logged;
   };
 
+  // Only of a plain name.
   std::string pathOf(std::string_view suite) const;
   // `result` is that of the stat call that filled `facts`.
   static Stamp stampOf(int result, const struct stat& facts);

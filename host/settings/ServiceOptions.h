@@ -25,9 +25,12 @@ struct ServiceOptions {
   bool socketIsDefault = false;           // then its folder is the service's own to make
   // Never empty: without the option and without a default the command line is wrong.
   std::string stateDirectory;
+  // One that is named must be there.
   std::optional<std::string> configurationFile;
   std::string defaultConfigurationFile;  // read when none is named and it is there
+  // Nothing: the device has neither of the known properties.
   std::optional<std::string> devicePropertiesFile;
+  // What is logged, from this level on, and where: "stderr", "journal" or a file's path.
   platform::LogLevel logLevel = platform::LogLevel::Default;
   std::string logTarget = "stderr";
 };

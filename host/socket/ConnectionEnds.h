@@ -24,15 +24,13 @@ class ConnectionEnds {
   ConnectionEnds(const ConnectionEnds&) = delete;
   ConnectionEnds& operator=(const ConnectionEnds&) = delete;
 
-  // The connection begins to end; a second call changes nothing. From here on whoever asks waits for it.
   void begin(Place& place) {
     if (place == 0) {
       place = ++last_;
       ends_.insert(place);
     }
   }
-  // All that the end made is handed over, so nothing of it can come any more. Calls those that waited for it and for no
-  // earlier one, in the order in which they asked; they may come back here.
+  // All that the end made is handed over.
   void finish(Place place) {
     ends_.erase(place);
     while (!waiting_.empty() && (ends_.empty() || *ends_.begin() > waiting_.front().after)) {

@@ -46,6 +46,7 @@ class ConnectionGate {
 
  private:
   const MainLoop& loop_;
+  // HostLimits::maxQueuedWork.
   std::size_t maxQueuedWork_;
   platform::UniqueFunction<bool()> shouldPause_;
   platform::UniqueFunction<bool()> isCrowded_;

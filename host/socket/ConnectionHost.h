@@ -35,6 +35,8 @@ class OpenConnection {
 
 class ConnectionHost {
  public:
+  // Who answers `status`, and who says when everything is committed: the platform, which alone knows the service and
+  // the recorder.
   using StatusSource = platform::UniqueFunction<plist::Dictionary()>;
   using SettleSource = platform::UniqueFunction<void(platform::Work done)>;
 
@@ -118,6 +120,7 @@ class ConnectionHost {
   // Threads: any.
   void resumeRequests() { loop.queue()->wake(); }
 
+  // The parts that connections use, open to them: each has its own header and says there what it does.
   MainLoop& loop;
   platform::Log& log;
   const HostLimits limits;
@@ -126,6 +129,7 @@ class ConnectionHost {
   FairShares shares;
   ConnectionEnds ends;
   HalfFrames halfFrames;
+  // After the loop and the log, on which it stands.
   RingBoard rings;
   // One for all connections: it keeps nothing between frames but scratch space and the key lists seen lately. A request
   // is served or held before the next one is decoded, so `request` and `refusal` are free again each time.

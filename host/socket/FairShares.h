@@ -116,8 +116,7 @@ class FairShares {
   // The user's own, shared by all holders that live; made on first sight. Users that are gone are forgotten now and
   // then.
   std::shared_ptr<ShareParty> partyOf(std::uint32_t user);
-  // Something came for the holder to do. Cheap when it waits for a turn already. One that owes waits behind its user's
-  // others; one that doesn't goes ahead of them.
+  // Something came for the holder to do. Cheap when it waits for a turn already.
   void ready(const std::shared_ptr<ShareHolder>& holder);
   // Gives turns until they cost `budget` or more, or nobody has anything to do. `mayServe(party)` is asked before each
   // turn of a user; one that may not keeps its place and its credit. Whether somebody is left who could go on at once.
@@ -154,13 +153,10 @@ class FairShares {
   }
 
  private:
-  // A visit without credit ends, or one seat has its turn; what that cost, at least 1 unless nobody else waits.
   std::int64_t serveOne();
   // The holder's turn, during which served() tells of it.
   ShareHolder::Turn serve(const ShareParty& party, ShareHolder& holder);
-  // The first user goes to the end of the line.
   void passOver();
-  // As of now: halved for each fading since it was written down.
   std::int64_t latelyOf(const ShareParty& party) const noexcept;
   void noteDone(ShareParty& party, std::int64_t cost) noexcept;
 
@@ -168,6 +164,7 @@ class FairShares {
   std::unordered_map<std::uint32_t, std::weak_ptr<ShareParty>> byUser_;
   const ShareParty* served_ = nullptr;
   std::int64_t lately_ = 0;  // of all users together
+  // Cost since the last fading, of which fading_ counts how many there were.
   std::int64_t sinceFading_ = 0;
   std::uint64_t fading_ = 0;
 };

@@ -34,6 +34,7 @@ class HalfFrames {
   using Moment = std::chrono::nanoseconds;
 
  private:
+  // A connection's half frame: who has it, since when, and how much.
   struct Entry {
     std::weak_ptr<Holder> holder;
     Moment begun;
@@ -97,6 +98,7 @@ class HalfFrames {
   const Moment longest_;
   const std::size_t maxBytes_;
   std::list<Entry> entries_;  // the one that has waited longest first
+  // Of all entries.
   std::size_t bytes_ = 0;
 };
 

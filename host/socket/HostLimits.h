@@ -1,4 +1,5 @@
-// HostLimits: every bound that protects the service from its clients, and what happens when it is reached.
+// HostLimits: every bound that protects the service from its clients, and what happens when it is reached. Plain data:
+// the configuration sets some of it, tests any.
 #pragma once
 
 #include <chrono>

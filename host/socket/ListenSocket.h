@@ -48,9 +48,11 @@ class ListenSocket {
   // Whether there is one, claimed or listening.
   explicit operator bool() const noexcept { return socket_ || lock_; }
   // "/run/x/socket", or "handed over".
+  // For log lines.
   const std::string& name() const noexcept { return name_; }
 
  private:
+  // What its end does, and another socket's taking its place.
   void close() noexcept;
 
   UniqueDescriptor socket_;

@@ -31,7 +31,7 @@ class QuotaUse {
   std::string refusalOfSession() const;
   // `more`: bytes of the request that would have to wait.
   std::string refusalOfWaitingBytes(std::size_t more) const;
-  // A message that isn't refused counts. `second` is that of the monotonic clock.
+  // A message that isn't refused counts.
   std::string refusalOfMessage(std::int64_t second);
   // Whether messages are counted at all: by default nobody asks the clock for this.
   bool limitsMessages() const noexcept {

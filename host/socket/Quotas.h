@@ -1,4 +1,5 @@
-// Quotas: what one connection and one user may have, and the text that says so when there is no more.
+// Quotas: what one connection and one user may have, and the text that says so when there is no more. Honest clients
+// never see it; it is there for those that loop, leak or mean harm.
 //
 // Threads: the main loop's.
 #pragma once

@@ -29,7 +29,6 @@ class ReplyOutput {
   ReplyOutput(const ReplyOutput&) = delete;
   ReplyOutput& operator=(const ReplyOutput&) = delete;
 
-  // One reply each, in the order of the calls; nothing is sent yet. Not once it is broken.
   void append(std::uint64_t id, std::initializer_list<plist::ValueView> results);
   void append(const NumbersReply& reply);
   void append(std::uint64_t id, const platform::RemoteError& error);
@@ -58,6 +57,7 @@ class ReplyOutput {
   std::size_t sentBytes_ = 0;
   // In bytes_, whole or in part.
   std::uint64_t unsentReplies_ = 0;
+  // Nothing is sent any more, and nothing may be appended.
   bool broken_ = false;
   bool resetSeen_ = false;
 };

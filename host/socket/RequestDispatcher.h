@@ -2,6 +2,9 @@
 // its way back to the request's connection.
 //
 // Threads: the main loop's. Replies come on the server queue, which is the same thread.
+//
+// What an operation takes and answers stands in one table of the wire; from it the compiler makes one entry for each,
+// so a request can't be handed over with another operation's arguments.
 #pragma once
 
 #include <cstdint>

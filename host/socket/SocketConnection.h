@@ -70,7 +70,6 @@ class SocketConnection final : public platform::Connection,
   void flush() override;
   // Shuts the socket's reading side; the end then comes the way it always does.
   void endInput() override;
-  // The client's part of the loop's work: its lane, then frame after frame, while the credit lasts.
   Turn takeTurn(std::int64_t credit) override;
   void finishWork() override;
   // Cuts the connection off.
@@ -81,7 +80,6 @@ class SocketConnection final : public platform::Connection,
   void sendError(std::uint64_t id, const platform::RemoteError& error) override;
   void dropReply() override { output_.countDropped(); }
 
-  // Not before there is an object, after the end's handlers, or while this user's requests aren't taken.
   bool takesRingRequests() override { return object_ != nullptr && host_.takesFrom(&party()); }
   void serveRingRequest(wire::DecodedRequest& request) override;
   void afterRingRequests(platform::Work work) override;
@@ -102,20 +100,19 @@ class SocketConnection final : public platform::Connection,
   // Does the next thing that is to be done, in this order: work of the lane, the held request, the next whole frame,
   // more bytes; whether there was one.
   bool serveNext();
+  // The next frame of those that are received; false when there is no whole one. A frame that is too long ends the
+  // connection.
   bool serveNextFrame();
   // Decodes one whole frame: a request, one that is answered with a refusal, or the end of the connection.
   void serveFrame(std::span<const std::byte> frame);
   void serveRequest(wire::DecodedRequest& request, std::size_t frameBytes);
-  // Keeps the request until it may be taken; it is the only one, as nothing is decoded after it. Refused when the
-  // user's waiting bytes are used up.
   void hold(wire::DecodedRequest& request, std::size_t frameBytes);
   // Answers once all that this connection sent before is committed.
   void settle(std::uint64_t id);
   // Why the request is beyond a quota; empty when it is not.
   std::string quotaRefusal(const wire::Request& request);
-  // Answers with error 4, over quota.
   void refuseRequest(std::uint64_t id, const std::string& why);
-  // Keeps what is known of the use of quotas in step, at the end of each turn.
+  // Keeps what is known of the use of quotas in step.
   void countSessions();
   void countWaitingBytes(std::size_t half);
   // While the gate is shut: answers `status` and stops at the first other request. At most one gulp is received for
@@ -129,31 +126,31 @@ class SocketConnection final : public platform::Connection,
   // Sends the reply, or counts it as dropped when nobody can get it any more.
   template <class... Content>
   void reply(const Content&... content);
-  // Encodes some more of a long reply; the rest waits in the lane, ahead of the client's next request.
   void sendRest(NumbersReply numbers);
-  // Whether the replies had better go out with those of the next turns: while more of the client's requests wait to be
-  // served, up to 4 KiB and 8 turns.
+  // Whether the replies had better go out with those of the next turns.
   bool gathersReplies();
 
   // The client closed, or is gone: inside a frame that is a cut, else an end in order or a reset.
   void peerEnded(bool reset);
-  // An end that isn't in order: counted, logged with the client, nothing more is sent.
   void cut(CutReason reason, const std::string& why);
-  // No more is received. Rings are read to their end, then the work that was handed over is done, then comes finish().
   void beginEnd(bool interrupted);
   // The handlers, the close, and the place of the end given back after what the handlers left to be done.
   void finish(bool interrupted);
 
+  // What it stands in, who it is, and what is called at its end.
   ConnectionHost& host_;
   UniqueDescriptor socket_;
   LogClient client_;
   std::string description_;
+  // Only ever goes on to a later one.
   State state_ = State::Fresh;
 
+  // Until the end's handlers have run; null before setExportedObject() too.
   std::shared_ptr<platform::TarnReportingServiceProtocol> object_;
   Handler interruptionHandler_;
   Handler invalidationHandler_;
 
+  // What came in and is not served yet, and the work that was handed over for it.
   wire::FrameBuffer frames_;
   bool inputWaits_ = false;  // the socket may have bytes
   bool peerGone_ = false;    // nobody will read a reply
@@ -164,11 +161,13 @@ class SocketConnection final : public platform::Connection,
   std::optional<wire::DecodedRequest> heldRequest_;  // the head request while the gate is shut
   std::size_t heldBytes_ = 0;                        // of its frame
   std::string refusal_;                              // the answer to every request; empty: they are served
+  // What it takes of its user's share.
   QuotaUse use_;
   HalfFrames::Place halfFrame_;
   bool framesTaken_ = false;         // since the half frame was noted
   std::uint32_t watchedEvents_ = 0;  // 0: not watched at all
 
+  // What goes out; a flush that was asked for, and how often in a row it was put off.
   ReplyOutput output_;
   bool flushAsked_ = false;
   int flushesPutOff_ = 0;

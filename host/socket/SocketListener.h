@@ -41,6 +41,7 @@ class SocketListener final : public platform::Listener,
   void handleEvents(std::uint32_t events) override;
 
  private:
+  // Watches the socket; where the system refuses that, it is tried again later.
   void startAccepting();
   // For 50 ms, and again as long as there is no room. Counted each time, logged the first.
   void pauseAccepting(const std::string& why);
@@ -49,8 +50,11 @@ class SocketListener final : public platform::Listener,
 
   ConnectionHost& host_;
   ListenSocket socket_;
+  // The service; weak, as it may end before the listener.
   std::weak_ptr<platform::ListenerDelegate> delegate_;
+  // Of the next connection; no number is given twice.
   std::uint64_t nextNumber_ = 1;
+  // The loop watches the socket.
   bool accepting_ = false;
   bool shortage_ = false;  // logged, and nobody was accepted since
 };

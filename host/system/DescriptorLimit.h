@@ -15,7 +15,7 @@ namespace tarn::linux_host {
 std::size_t raiseDescriptorLimit() noexcept;
 
 // How many connections the limit leaves room for. 64 descriptors are kept for the rest of the process (database, log,
-// settings, epoll and timers); of a limit that is at most twice that, half is given to connections, and never less than
+// settings, the loop's own); of a limit that is at most twice that, half is given to connections, and never less than
 // one.
 std::size_t connectionsWithin(std::size_t descriptorLimit) noexcept;
 

@@ -26,6 +26,7 @@ inline Error lastSystemError() {
 inline std::string errorSuffix(const Error& error) {
   return ": " + error.text;
 }
+// The same for an errno value.
 inline std::string errorSuffix(int number) {
   return errorSuffix(systemError(number));
 }

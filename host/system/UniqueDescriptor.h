@@ -15,6 +15,7 @@ namespace tarn::linux_host {
 class UniqueDescriptor {
  public:
   UniqueDescriptor() noexcept = default;
+  // Takes it over; a negative one is none.
   explicit UniqueDescriptor(int descriptor) noexcept : descriptor_(descriptor) {}
   // The other one has none afterwards.
   UniqueDescriptor(UniqueDescriptor&& other) noexcept : descriptor_(std::exchange(other.descriptor_, -1)) {}

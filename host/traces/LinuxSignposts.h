@@ -39,6 +39,7 @@ class LinuxSignposts final : public platform::Signposts {
 
   const platform::Clock& clock_;
   Mutex mutex_;
+  // Those of the traces that record, a handful at the most.
   std::vector<std::shared_ptr<SignpostBuffer>> buffers_ TARN_GUARDED_BY(mutex_);
 };
 

@@ -17,6 +17,7 @@ namespace tarn::linux_host {
 
 // One event of a trace: plain data of less than a hundred bytes, whose texts are the program's and aren't copied.
 struct SignpostRecord {
+  // What it tells of; the texts outlive every trace.
   platform::Signpost signpost;
   std::chrono::nanoseconds at{};          // of the monotonic clock
   std::chrono::nanoseconds duration{-1};  // of an interval; negative: a mark
@@ -25,6 +26,7 @@ struct SignpostRecord {
 
 class SignpostBuffer {
  public:
+  // What one drain brings.
   struct Content {
     std::vector<SignpostRecord> records;  // in the order in which they were taken
     std::uint64_t lost = 0;               // how many found no room after them
@@ -45,10 +47,12 @@ class SignpostBuffer {
   Content drain(std::vector<SignpostRecord> spare = {});
 
  private:
+  // Constant from the making on.
   const std::size_t mostRecords_;
   const std::chrono::nanoseconds since_;
   const std::function<void()> halfFull_;
   Mutex mutex_;
+  // With room for all that may come between two drains.
   std::vector<SignpostRecord> records_ TARN_GUARDED_BY(mutex_);
   std::uint64_t lost_ TARN_GUARDED_BY(mutex_) = 0;
 };

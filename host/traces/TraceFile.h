@@ -66,13 +66,16 @@ class TraceFile {
   // Into event_, up to the place where the members of the kind of event stand. Times are microseconds with three
   // decimals.
   void beginEvent(std::string_view phase, std::chrono::nanoseconds at, std::int32_t thread);
+  // Category and "subject.verb": texts of the program, which need no escapes.
   void appendNames(const platform::Signpost& signpost);
+  // Writes the event that names a thread, once for each.
   void nameThread(std::int32_t thread, std::chrono::nanoseconds at);
   // Writes the event out unless the file is full; whether it did. The one that finds too little room makes the file
   // full and has its place taken by the event that says so.
   bool endEvent(std::chrono::nanoseconds at);
   // Counts and holds back; a full block is written.
   void put(std::string_view text);
+  // Hands what is held back to the file; an error stays with that.
   void writeOut();
 
   const Facts facts_;
@@ -83,6 +86,7 @@ class TraceFile {
   std::string heldBack_;
   // Of the whole file so far, held back ones too.
   std::size_t bytes_ = 0;
+  // In the file, and not in it.
   std::uint64_t events_ = 0;
   std::uint64_t leftOut_ = 0;
   bool full_ = false;

@@ -94,22 +94,28 @@ class TraceRecording {
 
   // The folder "Audio/Traces" of the diagnostic logs is made where it is missing.
   Status openFile();
+  // Whether the session still wants it; from here on signposts reach the buffer.
   bool beginRecording(std::function<void()> wake);
+  // No signpost reaches the buffer any more; what it holds stays to be drained.
   void endRecording() noexcept;
   // Processor time in microseconds and memory in bytes, each as a counter event.
   void sampleLoad();
+  // One line, when the trace lacks events, that says how many and why.
   void logLeftOut() const;
+  // Makes a callback, unless the session was let go of. Without the lock, so that it may come back here.
   template <class Call>
   void tell(const Call& call);
 
   const TraceParts parts_;
   const PerformanceTraceLimits limits_;
+  // Who it is: number and token count the traces of the process.
   const std::int32_t templateNumber_;
   const std::uint64_t number_;
   const std::string token_;
 
   // The traces' thread's own.
   std::unique_ptr<TraceFile> file_;
+  // The room that the last drain's records took, for the next.
   std::vector<SignpostRecord> spare_;
   Status failure_;  // of the disk
 

@@ -38,6 +38,7 @@ class TraceThread {
   void end();
 
  private:
+  // What was posted, in the order of the calls.
   struct Command {
     Verb verb;
     std::shared_ptr<TraceRecording> recording;
@@ -47,6 +48,7 @@ class TraceThread {
   void work();
   // For a command, a buffer that is half full, or, while traces are open, the drain interval.
   void waitForWork() TARN_REQUIRES(mutex_);
+  // One command; recordings that begin join the open ones, and leave them at their end.
   void carryOut(const Command& command);
   // From the thread that fills a buffer: empties all of them soon.
   void wake();
@@ -58,6 +60,7 @@ class TraceThread {
   ConditionVariable changed_;
   std::thread thread_ TARN_GUARDED_BY(mutex_);
   std::vector<Command> commands_ TARN_GUARDED_BY(mutex_);
+  // A buffer is half full, and nobody has looked since.
   bool mustDrain_ TARN_GUARDED_BY(mutex_) = false;
   bool ended_ TARN_GUARDED_BY(mutex_) = false;
 };

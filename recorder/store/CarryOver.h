@@ -63,12 +63,14 @@ class CarryOver {
   std::int64_t lastToLookFor(std::int64_t known);
   // The next rows into some_; false when there are no more.
   bool readSome(double now);
+  // Keeps the row unless its checksum, or the kinds of its values, say that it isn't as it was written.
   void readRow(double now);
   // Those rows in one transaction, and what their ids tell of others that are missing.
   [[nodiscard]] Status writeSome(EventFile& into);
   // The notes, and the ids of the fresh file go on after the old one's.
   [[nodiscard]] Status finish(EventFile& into);
 
+  // Both as given.
   const std::filesystem::path from_;
   const std::optional<std::int64_t> upTo_;
   Connection connection_;
@@ -78,6 +80,7 @@ class CarryOver {
   EventGroup group_;
   // Read and not committed yet; kept over a failure of the fresh file.
   std::vector<Read> some_;
+  // In rising order, as far as it has come.
   std::vector<IdRange> lost_;
   // Of SQLite's machine: a tree that leads into itself ends with these.
   std::int64_t stepsLeft_ = 0;

@@ -29,8 +29,10 @@ class ChangeWatch {
  private:
   // Makes what is missing of the watch, at each wait: the folder may have come back.
   void begin();
+  // False for what is about other files of the folder.
   bool takeNews();
 
+  // What is watched, and how the names begin that count.
   const std::string folder_;
   const std::string name_;
   // -1 while the system gives none; closed at the end.

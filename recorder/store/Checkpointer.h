@@ -46,11 +46,14 @@ class Checkpointer {
 
   std::thread thread_;
   Connection connection_;  // while busy_, the thread's
+  // Not held during a checkpoint, so the writer is never kept waiting by one that it doesn't wait for.
   Mutex mutex_;
   ConditionVariable changed_;
+  // A checkpoint is under way, or about to be.
   bool busy_ TARN_GUARDED_BY(mutex_) = false;
   // The last one, by anything but a reader in the way; told to the next begin() once.
   bool failed_ TARN_GUARDED_BY(mutex_) = false;
+  // Pages; see takeBroughtIn().
   int broughtIn_ TARN_GUARDED_BY(mutex_) = 0;
   bool stopping_ TARN_GUARDED_BY(mutex_) = false;
 };

@@ -52,6 +52,7 @@ class Connection {
   std::string errorText() const;
 
  private:
+  // Null while it isn't open.
   sqlite3* database_ = nullptr;
 };
 

@@ -28,8 +28,7 @@ class EventBatch {
     plist::Dictionary detail;
   };
 
-  // Adds an event; returns the bytes that it is counted for: its place, its name and the memory of its dictionaries. A
-  // payload shared with the event before costs nothing more.
+  // Adds an event; returns the bytes that it is counted for. A payload shared with the event before costs nothing more.
   std::size_t add(std::string_view backend, std::string_view name, plist::Dictionary payload, plist::Dictionary detail,
                   double time);
   // Lets go of all events and keeps the room.
@@ -43,6 +42,7 @@ class EventBatch {
   std::size_t bytes() const noexcept { return bytes_; }
   // Valid until the next add(), as is its name.
   const Event& operator[](std::size_t index) const noexcept { return events_[index]; }
+  // Of an event of this batch.
   std::string_view name(const Event& event) const noexcept {
     return std::string_view(names_).substr(event.nameAt, event.nameSize);
   }
@@ -50,6 +50,7 @@ class EventBatch {
  private:
   // Names lie apart, as a text each would be an allocation each.
   std::vector<Event> events_;
+  // One after the other, in the events' order.
   std::string names_;
   std::size_t bytes_ = 0;
 };

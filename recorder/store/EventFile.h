@@ -47,6 +47,7 @@ class EventFile {
   // Opens the file, makes it and its folders when there is none, checks it through (once a file, which reads all of
   // it). After an error it is closed.
   [[nodiscard]] Status open();
+  // Whether begin() makes sense; it isn't after any fault that closed the file.
   bool isOpen() const noexcept { return connection_.isOpen(); }
   // Closes; when all is well the write-ahead log is brought in and removed, so that a copy of the one file is whole.
   void close() noexcept;
@@ -92,9 +93,10 @@ class EventFile {
   void skipTo(std::int64_t lastId) noexcept { lastId_ = std::max(lastId_, lastId); }
   // Ids that were committed and weren't in the file when it was opened: its log was cut or taken away. Told once.
   std::optional<IdRange> takeMissing() noexcept { return std::exchange(missing_, std::nullopt); }
-  // The last id of events that were expected in a file that holds nothing; 0 for none. Told once.
+  // The last id of events that were expected in a file that holds nothing; 0 for none. Told once. They may be in a file
+  // that somebody took away.
   std::int64_t takeGoneUpTo() noexcept { return std::exchange(goneUpTo_, 0); }
-  // What was put out of the way to open the file, by its new name. Told once.
+  // What was put out of the way to open the file, by its new name.
   std::vector<std::string> takePutAside() noexcept { return std::exchange(putAside_, {}); }
 
   // Compares rows with their checksums, from where it stopped until the deadline. Nothing when all is well so far;
@@ -109,7 +111,7 @@ class EventFile {
   std::uint64_t expired() const noexcept { return expired_; }
 
   // What the database may take, and how large its log grows before it is brought in while commits go on. At twice the
-  // size they wait for it.
+  // size they wait for it. Bytes; from the next expire() and checkpointIfDue() on.
   void setMaxBytes(std::int64_t maxBytes) noexcept { retention_.setMaxBytes(maxBytes); }
   void setLogLimit(std::int64_t bytes) noexcept { logLimit_ = bytes; }
   // Of the log after the last commit, in bytes; a reader that holds on to an old state keeps it from starting again,
@@ -118,7 +120,7 @@ class EventFile {
   // Brings the write-ahead log into the database when it has grown large enough: aside while commits go on, or here,
   // blocking, when it is twice that large. A reader in the way is no error.
   [[nodiscard]] Status checkpointIfDue();
-  // Whether that isn't over yet: another look will help.
+  // Whether that isn't over yet: another look will help. Also while a reader of an old state is in the way.
   bool hasMoreToBringIn() const noexcept { return logPages_ * pageBytes_ >= logLimit_; }
 
  private:
@@ -135,10 +137,8 @@ class EventFile {
   [[nodiscard]] Status checkIndex() const;
   std::int64_t indexBytes() const;
   [[nodiscard]] Status insertAs(std::int64_t id, const StoredEvent& event, Statement& statement);
-  // The checksums of what was appended since the last row of them; SQLite's result code.
   [[nodiscard]] int writeGroup();
   std::filesystem::path freeName(const std::string& suffix) const;
-  // The parts of open(), in their order.
   [[nodiscard]] Status openConnection();
   [[nodiscard]] Status checkContent();
   // What the file holds of a commit that failed, made safe before it counts.
@@ -150,12 +150,14 @@ class EventFile {
   const platform::Clock& clock_;
   Connection connection_;
   Checkpointer checkpointer_;
+  // Prepared once for each opening: these run with every commit, or every event.
   Statement begin_;
   Statement insert_;
   Statement carry_;
   Statement keepLastId_;
   Statement commit_;
   Statement insertGroup_;
+  // What runs inside the transactions, on this connection.
   Retention retention_;
   StoreCheck check_{connection_};
   RecorderTime time_;

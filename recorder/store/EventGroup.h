@@ -48,6 +48,7 @@ class EventGroup {
   std::int64_t size() const noexcept;
   std::int64_t end() const noexcept { return first_ + size(); }  // the id after the last one
   double seconds() const noexcept { return seconds_; }
+  // Whether it has a checksum of this id.
   bool holds(std::int64_t id) const noexcept { return id >= first_ && id < end(); }
   // Of an id that it holds.
   std::uint64_t hash(std::int64_t id) const noexcept;
@@ -56,6 +57,7 @@ class EventGroup {
   // Over what the row says of itself.
   std::uint64_t ownHash() const noexcept;
 
+  // What one row of the table says: its first id, its time, and eight bytes for each event.
   std::int64_t first_ = 0;
   double seconds_ = 0;
   std::string bytes_;  // of the events' checksums

@@ -1,9 +1,12 @@
 // EventReader: reads what the recorder holds, while it is being written or when no service runs.
 //
-// Owner: a tool. Opens the file read-only and keeps no transaction open between two calls. A file in a directory that
-// can't be written to is read as it lies there when nobody else has it open. When the file is set aside or replaced,
-// the reader goes on with the new one. The file isn't trusted: whatever it holds, it stays as it is, and a read ends
-// with rows or an error after work that its bytes are worth. Threads: one at a time.
+// Owner: a tool. Opens the file read-only and keeps no transaction open between two calls, so it never holds the log up
+// for longer than one page. A file in a directory that can't be written to is read as it lies there when nobody else
+// has it open. When the file is set aside or replaced, the reader goes on with the new one. The file isn't trusted:
+// whatever it holds, it stays as it is, and a read ends with rows or an error after work that its bytes are worth.
+// Threads: one at a time.
+//
+//   read(after 0) -> rows, lookedUpTo -> read(after that) ... more is false -> waitForChange() -> read() ...
 #pragma once
 
 #include <chrono>
@@ -76,6 +79,7 @@ class EventReader {
     friend bool operator==(const Identity&, const Identity&) = default;
   };
 
+  // Of the file at the path now; asks the system, not the database.
   Identity identity() const;
   // Of one that is read as it lies there any change makes another file of it.
   bool sameFile(const Identity& now) const noexcept;
@@ -87,7 +91,9 @@ class EventReader {
   // is carried out.
   [[nodiscard]] Status openAs(const std::string& name);
   void setBounds();  // of the read that begins
+  // Why the connection's last call failed, or that the read cost too much.
   Error lastError() const;
+  // Every error names the file.
   Error about(const std::string& what) const { return {0, file_.string() + ": " + what}; }
   // The id to read on after: less than what was asked for when the file began anew.
   std::int64_t startingPoint(std::int64_t after);
@@ -97,9 +103,11 @@ class EventReader {
   [[nodiscard]] Status readRows(const EventQuery& query, std::int64_t after, EventPage& page);
 
   const std::filesystem::path file_;
+  // Open from one read to the next, as long as the file stays the same.
   Connection connection_;
   // Of the folder, for waitForChange().
   ChangeWatch watch_;
+  // Of the file that is open, as it was then.
   Identity opened_;
   bool asItLies_ = false;             // opened without locks and log
   std::optional<Identity> lastRead_;  // the file of the last rows, nothing before the first ones

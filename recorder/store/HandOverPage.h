@@ -47,11 +47,14 @@ class HandOverPage {
   bool isTorn() const noexcept;
 
  private:
+  // What lies in the file.
   struct Page;
 
   void unmap() noexcept;
 
+  // Null while nothing is kept.
   Page* page_ = nullptr;
+  // MappedGuard's count when the file was mapped.
   std::uint64_t tornBefore_ = 0;
 };
 

@@ -48,6 +48,7 @@ class RecorderTime {
   const platform::Clock& clock_;
   const std::string boot_;
   double base_ = 0;  // seconds() less the monotonic clock
+  // Whether base_ is known: from the first file on.
   bool begun_ = false;
 };
 

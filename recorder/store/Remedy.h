@@ -6,6 +6,8 @@
 
 namespace tarn::recorder {
 
+// From the mildest on. Which of them helps decides what becomes of the file, so it rests on the code alone, never on a
+// text.
 enum class Remedy : std::uint8_t {
   Wait,      // a passing fault (a full disk, a lock): the same again later
   Reopen,    // a fault that a new connection may heal: open again later

@@ -49,6 +49,7 @@ class Retention {
  private:
   // The lowest id; `any` is false in an empty file.
   [[nodiscard]] int readOldest(std::int64_t& id, bool& any);
+  // Where the events that are too old end, by their groups; at most `atMost`.
   [[nodiscard]] int readAgedBefore(double cutoff, std::int64_t atMost, std::int64_t& before);
   // Removes the events before this id, with their groups and noted losses, and notes that the file holds what comes
   // after.
@@ -62,7 +63,9 @@ class Retention {
   [[nodiscard]] int giveBackPages(bool& gaveAny);
 
   RetentionLimits limits_;
+  // Between prepare() and finalize().
   Connection* connection_ = nullptr;
+  // Prepared once for each connection, as they run with every commit.
   Statement oldest_;
   Statement pageCount_;
   Statement freePages_;
@@ -71,6 +74,7 @@ class Retention {
   Statement removeGroups_;
   Statement removeLosses_;
   Statement keepHoldsAfter_;
+  // Of a page of the database, as prepare() found it.
   std::int64_t pageBytes_ = 0;
   bool hasMore_ = false;
 };

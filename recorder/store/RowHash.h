@@ -20,7 +20,8 @@ class RowHash {
     state_ = (state_ ^ value) * 0x9E3779B97F4A7C15ULL;
     state_ ^= state_ >> 32U;
   }
-  // SQLite keeps no negative zero and stores what isn't a number as nothing.
+  // By its bits, but for what SQLite doesn't keep: a negative zero becomes zero, and what isn't a number nothing, which
+  // reads as zero.
   void add(double value) noexcept { add(std::bit_cast<std::uint64_t>(value == 0 || value != value ? 0.0 : value)); }
   // Its length first, so that two texts in a row aren't the same as one.
   void add(std::string_view text) noexcept {

@@ -28,6 +28,7 @@ class StateUsage {
  private:
   const std::filesystem::path file_;
   const std::vector<std::filesystem::path> folders_;
+  // Bytes, of everything together.
   const std::int64_t cap_;
   std::int64_t beside_ = 0;  // of all but the database and its log
 };

@@ -1,6 +1,8 @@
 // Statement: one prepared SQLite statement. Owner: whoever owns the connection, which must outlive it. Threads: those
 // of the connection.
 //
+//   prepare -> bind -> step (a row) ... step (done) -> reset -> bind -> ...      or, without rows: bind -> run
+//
 // Operations that can fail answer SQLite's result code; the text of a failure is the connection's.
 #pragma once
 
@@ -31,11 +33,13 @@ class Statement {
   Statement& bind(int place, std::string_view text) noexcept;
   Statement& bindBytes(int place, std::string_view bytes) noexcept;
 
-  // One step: SQLITE_ROW, SQLITE_DONE or what went wrong.
+  // One step: SQLITE_ROW, SQLITE_DONE or what went wrong. After a row the next step goes on; after anything else it
+  // begins anew. May wait for a lock as long as the connection does.
   [[nodiscard]] int step() noexcept;
   // Back to its beginning, giving up its locks; rows' texts are gone.
   void reset() noexcept;
-  // Runs to the end and resets: SQLITE_OK or what went wrong. Rows are passed over.
+  // Runs to the end and resets: SQLITE_OK or what went wrong. Rows are passed over. For statements that change
+  // something.
   [[nodiscard]] int run() noexcept;
 
   // Of the row of the last step. Columns count from 0. A text lives until the next step.

@@ -74,9 +74,12 @@ class StoreCheck {
   void lose(std::int64_t first, std::int64_t end);
 
   Connection& connection_;
+  // Groups from an id on, and rows between two ids.
   Statement groups_;
   Statement rows_;
+  // That is looked at.
   EventGroup group_;
+  // Where goOn() goes on. Every id from the file's first up to here was looked at.
   std::int64_t next_ = 0;  // the id that must come next
   bool done_ = true;
   bool tolerant_ = false;

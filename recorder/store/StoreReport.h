@@ -1,5 +1,5 @@
 // StoreReport: whether a recorder's file is whole, looked at from outside: read-only, beside a running service or
-// without one. Threads: any.
+// without one. The same checks that the recorder itself makes, without its remedies: nothing is mended. Threads: any.
 #pragma once
 
 #include <cstdint>
@@ -14,6 +14,7 @@ namespace tarn::recorder {
 
 // What was found, as ids where there are any. With damage the rest is what could still be read.
 struct StoreReport {
+  // Events, by what became of them; ids in rising order.
   std::int64_t whole = 0;          // events that are as they were written
   std::vector<IdRange> lost;       // ids of events that are gone or aren't as they were written
   std::vector<IdRange> notedLost;  // likewise, and the recorder knows
