@@ -87,7 +87,7 @@ inline constexpr std::array<std::string_view, 10> kSnareReasonNames{"None",
 struct SnareRequest {
   // As makeSignature() made it.
   plist::Dictionary signature;
-  // How long a capture runs.
+  // How long a capture runs; a snapshot has 0.
   double durationSeconds = 0;
   // What the capture carries with it.
   std::optional<plist::Dictionary> payload;
