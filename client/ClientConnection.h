@@ -74,6 +74,7 @@ class ClientConnection {
   // For poll(); -1 once the connection has ended.
   int fd() const noexcept { return socket_.fd(); }
   bool wantsToWrite() const noexcept { return outgoing_.size() > written_; }
+  // False as soon as the end is known, though handlers may still have to hear of it.
   bool connected() const noexcept { return socket_.open(); }
   // Requests whose handlers are still to be called, held starts included.
   std::size_t outstanding() const noexcept { return pending_.size(); }

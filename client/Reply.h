@@ -26,6 +26,7 @@ struct Reply {
   // As the service sent them: one at most, of the operation's kind.
   std::vector<plist::Value> results;
 
+  // Whether `results` may be looked at.
   bool ok() const noexcept { return outcome == Outcome::Ok; }
   // The first result as an integer, a dictionary, a list of integers; 0 or empty when it is no such thing or there is
   // none. Numbers of other kinds, and whatever a list holds, are converted as ValueView::asInt64() does.

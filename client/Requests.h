@@ -12,6 +12,7 @@
 
 namespace tarn::client {
 
+// As the tools and the tests write them.
 using wire::Operation;
 using wire::Request;
 

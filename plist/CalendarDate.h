@@ -1,4 +1,5 @@
-// A moment as a calendar date and time of day in UTC (proleptic Gregorian). Stateless. Threads: any.
+// A moment as a calendar date and time of day in UTC (proleptic Gregorian). For every text form of a date, and for the
+// names of files; local time is the platform's (LocalCalendar). Stateless. Threads: any.
 #pragma once
 
 #include <cstdint>

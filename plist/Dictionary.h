@@ -63,6 +63,7 @@ class Array {
   friend class PackedImageWriter;
   // Takes over one reference; null is the empty array.
   explicit Array(detail::Body* body) noexcept : body_(body) {}
+  // One reference held.
   detail::Body* body_;
 };
 

@@ -49,6 +49,7 @@ class Key {
   // Takes over one reference.
   explicit Key(detail::KeyText* text) noexcept : text_(text) {}
 
+  // One reference held; null after a move.
   detail::KeyText* text_;
 };
 

@@ -75,6 +75,7 @@ class KeyList {
   // Whether any key starts with `prefix`.
   static bool hasPrefix(const detail::KeyListBody& body, std::string_view prefix) noexcept;
 
+  // One reference held; null: the empty list.
   detail::KeyListBody* body_;
 };
 

@@ -12,6 +12,8 @@ namespace tarn::plist::detail {
 
 // One allocation: this, then the keys. It stands in the table of lists until its last reference goes; all but the
 // counts and `extended` is written before anybody else sees it.
+//
+//   [this][Key][Key]...    each key a pointer to its text, one reference held
 struct KeyListBody {
   // Handles, dictionaries' blocks, and lists that were extended to this one. Only under the table's lock does it fall
   // to 0.

@@ -8,6 +8,8 @@
 namespace tarn::plist::detail {
 
 // One allocation: this, then the characters, without a zero at their end. All but the count never changes.
+//
+//   [references 4][size 4][hash 8][blank 1, room 7][characters]
 struct KeyText {
   // Keys of this text. Only under the table's lock does it fall to 0, so whoever finds it in the table may count it up.
   std::atomic<std::uint32_t> references;

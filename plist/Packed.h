@@ -91,6 +91,9 @@ enum class Tag : std::uint8_t {
 // Values in their packed form, one after the other without padding, in this machine's byte order. Nothing is checked:
 // the bytes are our own. Only the values' kinds and widths are remembered, so what is read is what was written.
 // Stateless.
+//
+//   true     01              42, signed                   02 2A             an array    11, then its block's address
+//   "abc"    0D 03 61 62 63  0.5 as a float of 32 bits    0A 00 00 00 3F
 class Packed {
  public:
   // Bytes that the value takes; 0 of an absent one, which can't be stored.

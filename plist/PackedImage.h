@@ -89,6 +89,7 @@ class PackedImageReader {
   bool readValues(std::size_t count);
   bool readValue();
 
+  // What isn't read yet.
   std::string_view left_;
   // By their numbers, from 1.
   std::vector<KeyList> lists_;

@@ -1,4 +1,9 @@
 // Value: a property-list value that owns itself; what a ValueView looks at when the value must outlive its place.
+//
+//   ValueView view = message.get("volume");    looks into the message
+//   Value kept = view;                         stays when the message goes
+//
+// Threads: as dictionaries: copies are independent, one object is for one thread at a time.
 #pragma once
 
 #include <cstdint>

@@ -13,6 +13,8 @@
 
 namespace tarn::wire {
 
+// One of the two sinks that there are; the other one, which benchmarks use, makes nothing.
+//
 // What a reader meets goes into the builder's open container, and a container that ends goes into the one around it.
 // Holds references alone, so one is made for each reading and costs nothing. Owned by a decoder's pass over one frame;
 // builder and cache are the decoder's and outlive it. Threads: one at a time.

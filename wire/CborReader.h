@@ -35,6 +35,11 @@ inline constexpr std::uint8_t kBreak = 0xFF;
 //   011 11001 00000001 00101100    a text of 300 bytes, which follow
 //   101 11111                      a map of indefinite length, up to the break
 //
+// A Simple is told by its information alone:
+//
+//   20 false    22 null         24 another one, in the next byte    26 a float of 32 bits, its argument
+//   21 true     23 undefined    25 a float of 16 bits               27 a float of 64 bits    31 the break
+//
 // What it announces (bytes, items, a float's bits) is not looked at yet.
 struct CborHead {
   // What the item is.
@@ -49,6 +54,8 @@ struct CborHead {
 
 // A cursor in bytes that it doesn't own, copied at will to look ahead. Its owner is a decoder's pass. Threads: one at a
 // time. Nothing throws; each read costs what it moves over. What it yields looks into the frame and lives as long.
+//
+//   if (!in.readHead(head) || head.major != Major::Text || !in.readBytes(head.argument, text)) return false;
 class CborReader {
  public:
   // The bytes must stay as long as the reader and all that it yielded.

@@ -3,6 +3,9 @@
 // What it writes is canonical: the shortest integers and lengths, definite lengths, a float as 32 and a double as 64
 // bits, a date as tag 1 over an integer when it has no fraction and over a double else, containers in their own order.
 //
+//   createReportingSession, id 1, reporter 42    05 00 00 00  83 01 01 18 2A
+//   its reply, true                              04 00 00 00  83 01 F6 F5
+//
 // Owned with its buffer by one connection. Threads: one at a time.
 #pragma once
 
@@ -22,8 +25,8 @@ namespace tarn::wire {
 void appendValue(std::string& out, const plist::ValueView& value);
 
 // Writes straight into the buffer that goes to the socket, so a frame is never copied. Numbers are written in as few
-// bytes as hold them, and a frame's length when its end is known. What it is given must be property-list values no
-// deeper than kMaxNesting: nothing is checked, since all of it was decoded or made here. Throws std::bad_alloc alone.
+// bytes as hold them, and a frame's length when its end is known. Nothing is checked: what lies deeper than kMaxNesting
+// or is no UTF-8 is found out by whoever decodes it. Throws std::bad_alloc alone.
 class Encoder {
  public:
   // Appends to what `out` holds. `out` must outlive the encoder.

@@ -56,6 +56,7 @@ class FrameBuffer {
   // Moves what is pending to the front of new memory of this size.
   void resize(std::size_t capacity);
 
+  // Above this a frame is Oversize.
   std::size_t maxFrameBytes_;
   std::unique_ptr<std::byte[]> bytes_;
   // Of bytes_; what is pending lies from begin_ to end_.

@@ -66,7 +66,13 @@ struct ArgumentRow {
   Member member;
 };
 
-// One row for each Argument, in their order, so that an argument leads to its row without a search.
+// One row for each Argument, in their order, so that an argument leads to its row without a search. What stands on the
+// wire for a member, and is refused when it is anything else:
+//
+//   std::int64_t                    an integer of 64 bits with its sign
+//   std::uint16_t, std::uint32_t    an unsigned integer within the type's range
+//   plist::Dictionary               a map that is a property list
+//   ReporterIDs                     an array of integers, or null
 inline constexpr std::array kArguments = {
     ArgumentRow{Argument::ReporterID, "reporterID", "reporter ID: a signed 64-bit integer expected",
                 &Request::reporterID},

@@ -8,6 +8,11 @@
 //   unknown operation; wrong count, kind or range of an argument; something
 //   inside a dictionary argument that is no property list                    Refused: answer with the error, go on
 //
+//   [1, 99]                    Refused, UnknownOperation: "unknown operation"
+//   [1, 1]                     Refused, BadArguments: "createReportingSession: wrong number of arguments"
+//   [1, 4, {"a": null}, 42]    Refused, NotPropertyList: "setConfiguration: not a property list: a null"
+//   [-1, 1, 42]                Unreadable: "no readable id"
+//
 // Lengths that are left open (indefinite) make a frame no less whole; inside a dictionary argument they are refused.
 // Nesting deeper than a property list may have costs no stack, and little more memory than the frame itself.
 //

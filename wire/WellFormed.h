@@ -1,5 +1,10 @@
 // Whether bytes are well-formed CBOR, whatever they mean. Asked only about frames that were found wanting, to tell
 // whether they can be answered. Internal to wire/.
+//
+//   80       well-formed: an empty array      1C 00    "a reserved item head"
+//   82 01    "the frame ends inside an item"  01 02    "bytes behind the array"
+//
+// Stateless. Threads: any.
 #pragma once
 
 #include <cstddef>
