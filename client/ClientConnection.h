@@ -78,7 +78,7 @@ class ClientConnection {
   bool connected() const noexcept { return socket_.open(); }
   // Requests whose handlers are still to be called, held starts included.
   std::size_t outstanding() const noexcept { return pending_.size(); }
-  // Replies to ids that nobody waits for: to a call that gave up, or twice to one request.
+  // Replies that belonged to no outstanding request, and were dropped.
   std::uint64_t unmatchedReplies() const noexcept { return unmatchedReplies_; }
 
   // Ends the connection; what is outgoing is dropped, and outstanding requests are Cancelled, at once or, inside a

@@ -86,6 +86,7 @@ class PendingReplies {
   void cancelStartsBefore(std::int64_t reporterID, std::uint64_t id);
   // Null when nobody waits for that ID. Looks by halves, since IDs ascend.
   Entry* find(std::uint64_t id);
+  // Takes answered ones off the front.
   void dropDone();
 
   std::deque<Entry> inOrder_;  // everything but starts, by ID; answered ones leave at the front

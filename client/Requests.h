@@ -68,7 +68,8 @@ inline Request getAllReporters() {
   return wire::makeRequest<Operation::GetAllReporters>();
 }
 
-// Has no reply: the end of the connection is its Ok.
+// Ends the service. Has no reply: the end of the connection is its Ok, and every other request that is outstanding then
+// gets ConnectionLost.
 inline Request killService() {
   return wire::makeRequest<Operation::KillService>();
 }

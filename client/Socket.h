@@ -42,7 +42,7 @@ class Socket {
   // sending never waits, receiving waits for the first byte when told to, at most as long as was set.
   std::ptrdiff_t sendSome(std::string_view bytes) noexcept;
   std::ptrdiff_t receiveSome(std::span<std::byte> space, bool mayWait) noexcept;
-  // Waits until the socket can be read or, when asked, written. False when the time is over.
+  // Waits until the socket can be read or, when asked, written. False when the time is over, or a signal came first.
   bool waitUntilReady(bool forWriting, std::chrono::milliseconds timeout) const noexcept;
 
  private:

@@ -16,7 +16,8 @@
 
 namespace tarn::platform {
 
-// The numbers are the service's; a channel may carry others.
+// What a channel holds: one number, states with their times, or counts of how often a value lay in which range. The
+// numbers are the service's; a channel may carry others.
 enum class FlumeFormat : std::uint8_t { Invalid = 0, Simple = 1, State = 2, Histogram = 3, SimpleArray = 4 };
 
 // What a channel is known by. A part that the driver doesn't tell is missing, which is not the same as an empty one.

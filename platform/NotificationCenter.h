@@ -17,6 +17,7 @@ class WorkQueue;
 // when nobody is registered. A notification carries nothing else: it says that something changed.
 class NotificationCenter {
  public:
+  // The status of a registration that worked; other numbers are the platform's.
   static constexpr std::int32_t kStatusOk = 0;
 
   // What registerFor() answers.

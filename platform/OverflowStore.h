@@ -22,7 +22,9 @@ class OverflowStore {
   // How much memory logs may take before the store is used, in bytes: those of one session, and all together. The
   // largest numbers stand for no bound.
   struct Bounds {
+    // Of one session's log; its oldest messages go first.
     std::size_t bytesOfSession = std::numeric_limits<std::size_t>::max();
+    // Of all logs; the largest one gives way.
     std::size_t bytesInAll = std::numeric_limits<std::size_t>::max();
 
     bool operator==(const Bounds&) const = default;

@@ -16,7 +16,9 @@ namespace tarn::platform {
 // What is recorded, by a number of the service's own, and whether the file is packed at the end. A service may refuse
 // either.
 struct PerformanceTraceConfiguration {
+  // Which kinds of events are recorded, and with what beside them.
   std::int32_t templateNumber = 2;
+  // A platform that never packs its files refuses it.
   bool compressWhenFinished = true;
 };
 

@@ -46,6 +46,7 @@ class RtcReportingSession {
   using StartCompletion = UniqueFunction<void(const std::optional<std::vector<std::string>>& backends)>;
   // What the service says of a message. Nothing is tried again.
   struct SendResult {
+    // Whether the service took it.
     bool sent = false;
     Status error{};  // a message may fail without one
   };

@@ -144,7 +144,8 @@ class Dictionary {
   bool sharesStorageWith(const Dictionary& other) const noexcept { return body_ == other.body_; }
   // Whether both have the same keys in the same order. Costs a comparison of two addresses.
   bool sharesKeysWith(const Dictionary& other) const noexcept;
-  // Whether its keys are exactly these in this order.
+  // Whether its keys are exactly these in this order. Costs a comparison of two addresses, so shapes that are known
+  // before are cheap to recognise.
   bool hasKeys(const KeyList& keys) const noexcept;
   // The hash of its key list (KeyList::hash), 0 of an empty one. The same for the same keys in the same order, in one
   // run.

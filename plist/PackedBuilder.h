@@ -64,6 +64,7 @@ class PackedBuilder {
   // An open container: where its part of `bytes_` and `keys_` begins, how many values it has, the hash of its keys so
   // far.
   struct Level {
+    // Where its values and keys begin, how many there are, and what finishing needs to know of them.
     std::size_t bytesBegin;
     std::size_t keysBegin;
     std::size_t count;

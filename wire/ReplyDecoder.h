@@ -25,7 +25,9 @@ namespace tarn::wire {
 struct ReplyError {
   // The wire's own (kErrorDomain) or the service's.
   std::string domain;
+  // By its domain; wire::ErrorCode for the wire's own.
   std::int64_t code = 0;
+  // For people.
   std::string text;
 };
 

@@ -37,6 +37,7 @@ enum class DecodeVerdict {
 };
 
 struct Refusal {
+  // What the client is told.
   ErrorCode code = ErrorCode::BadArguments;
   // For people: the operation's name, and what was expected in the place; or what makes the frame unreadable. English,
   // and never the client's own bytes, so it may go into a log as it is.
@@ -54,6 +55,7 @@ class RequestDecoder {
   DecodeVerdict decode(std::span<const std::byte> frame, DecodedRequest& request, Refusal& refusal);
 
  private:
+  // Scratch space and lists for decode(); nothing of an earlier frame.
   plist::PackedBuilder builder_;
   plist::KeyListCache keyLists_;
 };

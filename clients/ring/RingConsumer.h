@@ -5,6 +5,9 @@
 //          -> Empty
 //          -> Broken: the positions or lengths make no sense; nothing more is to be read from this ring
 //
+//   position   given back         taken                                       head
+//              | accepted, kept . | next record ... published, not looked at  | nothing yet
+//
 // What was accepted is given back to the writer by publish(). One owner a ring, which also owns the memory. Threads:
 // one at a time.
 #pragma once

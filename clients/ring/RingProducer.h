@@ -1,6 +1,12 @@
 // RingProducer: the writing side of a ring. Puts records into the shared memory and publishes them by one store, so
 // that a thread that stops or dies in the middle has published nothing.
 //
+//   position   taken              head                                        taken + data bytes
+//              | not read yet ... | [gap] [filler] record, being written ...  | room that is left
+//
+// What is dropped is told where it is missing: a gap record stands before the next one that fits. Where the record
+// would go around the end of the area, a filler takes the rest of it.
+//
 // Keeps its positions to itself and believes nothing that the reader writes: a wrong `taken` makes the ring look full,
 // never larger. It allocates nothing, waits for nothing and makes no system call; whoever posts asks mustWake() then.
 //

@@ -44,7 +44,9 @@ class Bytes {
       size_ += count;
     }
   }
+  // The bytes that the other one has, failed or not; the caller asks failed() of both.
   void append(const Bytes& other) noexcept { append(other.data(), other.size()); }
+  // For heads, byte by byte.
   void append(std::uint8_t byte) noexcept { append(&byte, 1); }
   // Drops so many bytes from the front, at most size(); moves what is left.
   void dropFront(std::size_t count) noexcept {
@@ -81,6 +83,7 @@ class Bytes {
   std::uint8_t* data_ = nullptr;
   std::size_t size_ = 0;
   std::size_t capacity_ = 0;
+  // From the first refusal of memory on, until clear() or release().
   bool failed_ = false;
 };
 

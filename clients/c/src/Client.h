@@ -37,6 +37,7 @@ struct tarnreporting_session {
   tarnreporting_session* next = nullptr;
   tarnreporting_shape* shapes = nullptr;  // those of fields in the order of their last use
   std::uint32_t fieldShapes = 0;
+  // As the program gave it, 0 to 65535.
   std::uint32_t serviceType = 0;
   tarn::reporting::Bytes configuration;  // one map
   // By which the service knows it: a new one each time it is announced, counted from a random start so that clients
@@ -45,6 +46,7 @@ struct tarnreporting_session {
   bool announced = false;       // on this connection
   // An ended session that no service ever saw is kept until one has, so that what was posted to it is served.
   bool everAnnounced = false;
+  // Nothing is posted to it any more; `end` counts.
   bool ending = false;
   tarn::reporting::Heads end;  // when the session was ended: what lies before belongs to it
 };
@@ -53,6 +55,7 @@ namespace tarn::reporting {
 
 // What came of messages, as tarnreporting_state tells it: of writers that are gone, or of all.
 struct Totals {
+  // Messages, by what became of them.
   std::uint64_t posted = 0;
   std::uint64_t taken = 0;
   std::uint64_t committed = 0;
@@ -126,6 +129,7 @@ struct tarnreporting_client {
   int waitTime(std::int64_t now) noexcept;
   // Makes the helper's next turn come now; from any thread.
   void wakeHelper() noexcept;
+  // False when the system has no thread to give.
   bool startHelper() noexcept;
 
   // All that the service must know of the session or the shape, as requests on the link.
@@ -141,6 +145,8 @@ struct tarnreporting_client {
   void tendSessions() noexcept;
   // A shape that isn't known to the session yet. Null when there is no memory.
   tarnreporting_shape* makeShape(Session& session, const tarnreporting_shape_options& options) noexcept;
+  // Gives the shape a number and lists it with its session. TOO_LARGE when no number is free, CLOSED when the session
+  // ends.
   int enter(Shape& shape) noexcept;
   // The session's shape of these keys and kinds, made if there is none. It is the first of the list afterwards, so that
   // the last of its kind is the one whose use is the longest ago.
@@ -179,8 +185,10 @@ struct tarnreporting_client {
   std::uint32_t* alive_ = nullptr;  // a page that reads as zero in a child
   pthread_mutex_t mutex_ = PTHREAD_MUTEX_INITIALIZER;
   pthread_t helper_{};
+  // An eventfd by which callers end the helper's wait.
   int wake_ = -1;
   char path_[tarn::reporting::Link::kMostPath] = {};  // the one asked for
+  // The program's function and what it wants to be handed; null: nobody is told.
   void (*onRefusal_)(void*, const char*) = nullptr;
   void* context_ = nullptr;
 
@@ -201,10 +209,13 @@ struct tarnreporting_client {
   std::uint32_t forgetting_ = 0;
   // Of writers that were retired.
   tarn::reporting::Totals gone_;
+  // Errors that came instead of results.
   std::uint64_t requestsRefused_ = 0;
   // With a zero at its end. Kept over later successes.
   char lastError_[sizeof(tarnreporting_state::last_error)] = {};
+  // lastError_ is a refusal that onRefusal_ hasn't heard of.
   bool refusalToTell_ = false;
+  // The helper ends with its next look.
   bool stopping_ = false;
 };
 

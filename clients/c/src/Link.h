@@ -1,6 +1,8 @@
 // Link: the connection to the service: requests out, the fronts of replies in. Never waits. When anything goes wrong it
 // closes itself, and whoever owns it starts again.
 //
+//   begin() -> arguments into out() -> end() ... flush() -> socket -> receive() -> take(reply)
+//
 // Owned by the client, used under its lock. Threads: one at a time.
 #pragma once
 

@@ -1,5 +1,10 @@
 // Whether a text is UTF-8: no stray byte, no overlong form, no surrogate, nothing over U+10FFFF. Bounded by the text's
 // length, and eight bytes at a time where they are ASCII. Stateless. Threads: any.
+//
+//   00-7F                      one byte
+//   C2-DF 80-BF                two
+//   E0-EF 80-BF 80-BF          three; after E0 from A0 on, after ED up to 9F
+//   F0-F4 80-BF 80-BF 80-BF    four; after F0 from 90 on, after F4 up to 8F
 #pragma once
 
 #include <cstddef>
