@@ -40,7 +40,8 @@ class WorkLane {
     return current_ != nullptr && current_->queue_ == queue ? current_ : nullptr;
   }
 
-  bool empty() const noexcept { return !rest_ && next_ == pieces_.size(); }
+  bool empty() const noexcept { return pieces() == 0; }
+  std::size_t pieces() const noexcept { return pieces_.size() - next_ + (rest_ ? 1 : 0); }
   void add(platform::Work work) { pieces_.push_back(std::move(work)); }
   void addNext(platform::Work rest) { rest_ = std::move(rest); }
   // The next piece; only when there is one.
