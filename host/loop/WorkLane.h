@@ -43,7 +43,8 @@ class WorkLane {
     return current_ != nullptr && current_->queue_ == queue ? current_ : nullptr;
   }
 
-  bool empty() const noexcept { return !rest_ && next_ == pieces_.size(); }
+  bool empty() const noexcept { return pieces() == 0; }
+  std::size_t pieces() const noexcept { return pieces_.size() - next_ + (rest_ ? 1 : 0); }
   void add(platform::Work work) { pieces_.push_back(std::move(work)); }
   // Ahead of what waits. One at a time: the piece that runs gives way once, as the last thing it does.
   void addNext(platform::Work rest) { rest_ = std::move(rest); }

@@ -41,6 +41,8 @@ class RingOwner {
   virtual void afterRingRequests(platform::Work work) = 0;
   // A checked request of the service, to which there is no reply. It may be moved from.
   virtual void serveRingRequest(wire::DecodedRequest& request) = 0;
+  // The record of the last request is done with: what it asked for may be done before the next one is read.
+  virtual void workOffRingRequest() = 0;
   // Names the client in a log line.
   virtual std::string description() const = 0;
 };

@@ -157,7 +157,7 @@ ShareHolder::Turn SocketConnection::takeTurn(std::int64_t credit) {
   if (!more) {
     countWaitingBytes(state_ == State::Open ? frames_.pendingBytes() : 0);
   }
-  return {lane_.spent(), more};
+  return {lane_.spent() + std::exchange(ringCost_, 0), more};
 }
 
 void SocketConnection::countSessions() {

@@ -82,6 +82,7 @@ class SocketConnection final : public platform::Connection,
 
   bool takesRingRequests() override { return object_ != nullptr && host_.takesFrom(&party()); }
   void serveRingRequest(wire::DecodedRequest& request) override;
+  void workOffRingRequest() override;
   void afterRingRequests(platform::Work work) override;
 
  private:
@@ -156,6 +157,7 @@ class SocketConnection final : public platform::Connection,
   bool peerGone_ = false;    // nobody will read a reply
   ConnectionEnds::Place end_ = 0;
   WorkLane lane_;
+  std::int64_t ringCost_ = 0;                        // of work for its rings ahead of its turn, not charged yet
   std::vector<UniqueDescriptor> descriptors_;        // that came last, for openRing
   std::shared_ptr<ConnectionRings> rings_;           // once it has any
   std::optional<wire::DecodedRequest> heldRequest_;  // the head request while the gate is shut

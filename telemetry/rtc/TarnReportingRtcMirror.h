@@ -19,6 +19,7 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "platform/RtcReportingService.h"
@@ -74,7 +75,14 @@ class TarnReportingRtcMirror : public std::enable_shared_from_this<TarnReporting
   // Whether a start was handed over that has not asked for backends yet. A stop that comes in that time helps the start
   // along first.
   bool isStarting() const noexcept { return starting_.load(); }
-  void setStarting() noexcept { starting_.store(true); }
+  void setStarting() noexcept {
+    isInert_ = false;
+    starting_.store(true);
+  }
+  // Whether its start came to nothing: a message has nothing to wait for then.
+  bool isInert() const noexcept { return isInert_.load() && !rtcReportingSessionStarted(); }
+  // What became of a message to one that has no session of the service.
+  static void tellNeverStarted(std::string_view operation);
   // Whether a session of the service can be used.
   bool rtcReportingSessionStarted() const noexcept { return rtcReportingSessionStarted_.load(); }
 
@@ -113,6 +121,7 @@ class TarnReportingRtcMirror : public std::enable_shared_from_this<TarnReporting
   std::atomic<bool> started_{false};
   std::atomic<bool> rtcReportingSessionStarted_{false};
   std::atomic<bool> starting_{false};
+  std::atomic<bool> isInert_{false};
   TarnReportingQueueSemaphore rtcreportingBackendSemaphore_;
   std::shared_ptr<platform::SuspendableQueue> rtcReportingQueue_;
   // Of the private queue.

@@ -25,12 +25,14 @@ class NotingOwner : public linux_host::RingOwner {
     requests.push_back(request);
     ++count;
   }
+  void workOffRingRequest() override { workedOff.push_back(requests.size()); }
   void afterRingRequests(platform::Work work) override { loop_.queue()->async(std::move(work)); }
   std::string description() const override { return "connection 1 of process 2"; }
 
   std::atomic<bool> takes{true};
   std::atomic<std::size_t> count{0};
   std::vector<wire::DecodedRequest> requests;
+  std::vector<std::size_t> workedOff;  // so many requests had come each time
 
  private:
   linux_host::MainLoop& loop_;

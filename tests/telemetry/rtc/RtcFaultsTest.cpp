@@ -45,6 +45,16 @@ TEST_F(RtcFaults, WithoutAListTheSessionIsDropped) {
   EXPECT_EQ(onlySession().flushes, 0U);
 }
 
+TEST_F(RtcFaults, AMessageToAWorkerWithoutASessionWaitsForNothing) {
+  platform_.rtcReporting.setBackends({});
+  const auto session = startSession();
+  session->sendMessage(message({{"n", 1}}));  // nothing runs on the private queue
+  EXPECT_EQ(lines().back(), "default Session never started. handleMessage");
+  EXPECT_EQ(count("default Session never started. handleMessage"), 1U);
+  platform_.runUntilIdle();
+  EXPECT_EQ(count("default Session never started. handleMessage"), 1U);
+}
+
 TEST_F(RtcFaults, AnEmptyListIsAList) {
   platform_.rtcReporting.setBackends(std::vector<std::string>{});
   const auto session = startSession();
