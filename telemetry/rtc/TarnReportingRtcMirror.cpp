@@ -78,8 +78,8 @@ const std::shared_ptr<platform::SuspendableQueue>& TarnReportingRtcMirror::rtcRe
 
 void TarnReportingRtcMirror::start(const Started& session) {
   const bool asked = open(session);
-  starting_ = false;
   isInert_ = !asked;
+  --startsAhead_;
   if (asked) {
     kLog(LogLevel::Default, "waiting to find backends");
     rtcreportingBackendSemaphore_.wait(rtcReportingQueue_, kBackendWait,

@@ -74,13 +74,10 @@ class TarnReportingRtcMirror : public std::enable_shared_from_this<TarnReporting
   void setStarted(bool started) noexcept { started_.store(started); }
   // Whether a start was handed over that has not asked for backends yet. A stop that comes in that time helps the start
   // along first.
-  bool isStarting() const noexcept { return starting_.load(); }
-  void setStarting() noexcept {
-    isInert_ = false;
-    starting_.store(true);
-  }
-  // Whether its start came to nothing: a message has nothing to wait for then.
-  bool isInert() const noexcept { return isInert_.load() && !rtcReportingSessionStarted(); }
+  bool isStarting() const noexcept { return startsAhead_.load() != 0; }
+  void setStarting() noexcept { ++startsAhead_; }
+  // Whether its last start came to nothing and none is ahead: a message has nothing to wait for then.
+  bool isInert() const noexcept { return isInert_.load() && !isStarting() && !rtcReportingSessionStarted(); }
   // What became of a message to one that has no session of the service.
   static void tellNeverStarted(std::string_view operation);
   // Whether a session of the service can be used.
@@ -120,7 +117,8 @@ class TarnReportingRtcMirror : public std::enable_shared_from_this<TarnReporting
   const std::size_t longestSummary_;
   std::atomic<bool> started_{false};
   std::atomic<bool> rtcReportingSessionStarted_{false};
-  std::atomic<bool> starting_{false};
+  // Starts that were handed over and haven't run: on a busy machine a session may stop and start again before.
+  std::atomic<int> startsAhead_{0};
   std::atomic<bool> isInert_{false};
   TarnReportingQueueSemaphore rtcreportingBackendSemaphore_;
   std::shared_ptr<platform::SuspendableQueue> rtcReportingQueue_;

@@ -55,6 +55,19 @@ TEST_F(RtcFaults, AMessageToAWorkerWithoutASessionWaitsForNothing) {
   EXPECT_EQ(count("default Session never started. handleMessage"), 1U);
 }
 
+TEST_F(RtcFaults, AMessageWaitsForAStartThatIsStillAhead) {
+  platform_.rtcReporting.setHandsOutTokens(false);
+  const auto mirror = std::make_shared<TarnReportingRtcMirror>(platform_.rtcReporting, 1000);
+  mirror->setStarting();
+  mirror->setStarting();  // after a stop that came before the first had run
+  mirror->start({});
+  EXPECT_TRUE(mirror->isStarting());
+  EXPECT_FALSE(mirror->isInert());
+  mirror->start({});
+  EXPECT_FALSE(mirror->isStarting());
+  EXPECT_TRUE(mirror->isInert());
+}
+
 TEST_F(RtcFaults, AnEmptyListIsAList) {
   platform_.rtcReporting.setBackends(std::vector<std::string>{});
   const auto session = startSession();
