@@ -467,13 +467,16 @@ Status EventFile::checkpointIfDue() {
     logPages_ = 0;
   }
   const std::int64_t bytes = logPages_ * pageBytes_;
-  if (bytes < logLimit_ || (bytes < 2 * logLimit_ && checkpointer_.begin())) return {};
+  // After a failure nothing is well before it works: a file that was opened again counts its log from the next commit.
+  const bool isDue = bytes >= logLimit_ || bringInFailed_;
+  if (!isDue || (bytes < 2 * logLimit_ && !bringInFailed_ && checkpointer_.begin())) return {};
   checkpointer_.finish();
   int pages = 0;
   const int code = sqlite3_wal_checkpoint_v2(connection_.handle(), nullptr, SQLITE_CHECKPOINT_PASSIVE, &pages, nullptr);
   // A reader in the way is no fault: the rest is brought in later.
   if ((code & 0xFF) == SQLITE_BUSY) return {};
-  if (code == SQLITE_OK) {
+  bringInFailed_ = code != SQLITE_OK;
+  if (!bringInFailed_) {
     logPages_ = 0;
   }
   return connection_.errorOf(code);

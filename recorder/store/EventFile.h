@@ -180,6 +180,7 @@ class EventFile {
   std::uint64_t logInode_ = 0;    // of the write-ahead log after the last commit
   std::int64_t pageBytes_ = 8192;
   std::int64_t logLimit_ = std::int64_t{8} << 20;
+  bool bringInFailed_ = false;  // the last time that the log was to be brought in, whatever was opened since
   std::int64_t logBytes_ = 0;
   int logPages_ = 0;  // in the write-ahead log after the last commit
 };
