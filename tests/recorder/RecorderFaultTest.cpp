@@ -213,7 +213,7 @@ TEST_F(RecorderFault, AFileThatMayNotGrowIsWrittenOnWhenItMay) {
     ASSERT_EQ(::setrlimit(RLIMIT_FSIZE, &limit), 0);
     start();
     recordMany(4000, 1000);
-    ASSERT_TRUE(eventually([&] { return errors() == 1; }));
+    ASSERT_TRUE(eventually([&] { return errors() >= 1; }));
     EXPECT_FALSE(recorder_->flush(std::chrono::milliseconds(200)));
     limit.rlim_cur = before;
     ASSERT_EQ(::setrlimit(RLIMIT_FSIZE, &limit), 0);
