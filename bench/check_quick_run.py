@@ -60,8 +60,8 @@ ROWS = [
     ("evaluation of a trace, processor time", ("by the clock",)),
 ]
 for part in ("median", "p99.9", "worst"):
-    ROWS.append((f"post of a message, service alive, {part}", ("bare copy",)))
-    ROWS.append((f"post of a message, service stopped, {part}", ("bare copy",)))
+    for state in ("alive", "stopped", "absent", "killed over and over", "without room on its disk"):
+        ROWS.append((f"post of a message, service {state}, {part}", ("bare copy",)))
     ROWS.append((f"the clock around each of them, {part}", ("",)))
 for kind in ("ordinary", "merging pairs", "ending segments", "ordinary, summary file"):
     ROWS.append((f"stop of 10^3 messages, {kind}, a message", ("in all",)))
