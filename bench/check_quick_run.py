@@ -67,8 +67,10 @@ for kind in ("ordinary", "merging pairs", "ending segments", "ordinary, summary 
     ROWS.append((f"stop of 10^3 messages, {kind}, a message", ("in all",)))
     ROWS.append((f"stop of 10^4 messages, {kind}, a message", ("in all",)))
     ROWS.append((f"stop of 10^4 messages, {kind}, extra memory", ("the log",)))
-FIGURE = re.compile(r"^-?\d+(\.\d+)? (ms|us|ns|MB|B|k/s|threads)$")
-PEER = re.compile(r"^(?P<name>.+?) \d+(\.\d+)? (ms|us|ns|MB|B|k/s)( \(.*\))?$")
+ROWS.append(("wake-ups a second with 50 quiet rings, service", ("without rings",)))
+ROWS.append(("wake-ups a second with 50 quiet rings, library", ("",)))
+FIGURE = re.compile(r"^-?\d+(\.\d+)? (ms|us|ns|MB|B|k/s|/s|threads)$")
+PEER = re.compile(r"^(?P<name>.+?) \d+(\.\d+)? (ms|us|ns|MB|B|k/s|/s)( \(.*\))?$")
 
 
 def rows_of(output):
