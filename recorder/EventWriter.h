@@ -23,7 +23,7 @@
 #include "recorder/store/CarryOver.h"
 #include "recorder/store/EventBatch.h"
 #include "recorder/store/EventFile.h"
-#include "recorder/store/StateUsage.h"
+#include "recorder/store/files/StateUsage.h"
 
 namespace tarn::recorder {
 

@@ -10,9 +10,9 @@
 #include <system_error>
 #include <utility>
 
-#include "recorder/store/MappedGuard.h"
 #include "recorder/store/Remedy.h"
 #include "recorder/store/StoreLayout.h"
+#include "recorder/store/files/MappedGuard.h"
 
 namespace tarn::recorder {
 
