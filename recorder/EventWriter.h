@@ -18,6 +18,7 @@
 #include "platform/Clock.h"
 #include "platform/Log.h"
 #include "plist/Result.h"
+#include "recorder/CommitPace.h"
 #include "recorder/RecorderLog.h"
 #include "recorder/RecorderOptions.h"
 #include "recorder/store/CarryOver.h"
@@ -53,6 +54,8 @@ class EventWriter {
   bool hasMoreToExpire() const noexcept { return file_.hasMoreToExpire(); }
   bool hasMoreToBringIn() const noexcept { return file_.isOpen() && file_.hasMoreToBringIn(); }
   std::uint64_t expired() const noexcept { return file_.expired(); }
+  // How fast it goes.
+  const CommitPace& pace() const noexcept { return pace_; }
   const std::string& problem() const noexcept { return problem_; }
 
  private:
@@ -76,6 +79,7 @@ class EventWriter {
   RecorderLog log_;
   EventFile file_;
   StateUsage usage_;
+  CommitPace pace_;
   plist::Dictionary lastPayload_;  // whose text payloadText_ is
   std::string payloadText_ = "{}";
   std::string detailText_;

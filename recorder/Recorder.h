@@ -105,6 +105,7 @@ class Recorder {
   bool verify() TARN_REQUIRES(mutex_);
   void noteUse() noexcept TARN_REQUIRES(mutex_);
   void noteOldest() TARN_REQUIRES(mutex_);
+  void notePace() TARN_REQUIRES(mutex_);
   bool hasRoom() const TARN_REQUIRES(mutex_);
   void account(std::size_t events, std::size_t bytes) TARN_REQUIRES(mutex_);
   void answerSettled() TARN_REQUIRES(mutex_);
@@ -147,6 +148,7 @@ class Recorder {
   std::int64_t lastId_ TARN_GUARDED_BY(mutex_) = 0;  // of the last committed event
   bool countsOpen_ TARN_GUARDED_BY(mutex_) = false;
   bool busy_ TARN_GUARDED_BY(mutex_) = false;          // the last group was large
+  std::size_t most_ TARN_GUARDED_BY(mutex_);           // events that may wait, at the pace of the last commits
   std::uint64_t awaited_ TARN_GUARDED_BY(mutex_) = 0;  // handed over before the last flush() or settle()
   std::deque<Settling> settling_ TARN_GUARDED_BY(mutex_);
   bool asleep_ TARN_GUARDED_BY(mutex_) = false;  // the writer waits for the first event of a group
