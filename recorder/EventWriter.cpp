@@ -55,7 +55,8 @@ EventWriter::EventWriter(const RecorderOptions& options, platform::Log& log, con
       clock_(clock),
       log_(log),
       file_(options.file, limitsOf(options), clock, options.boot.empty() ? RecorderTime::currentBoot() : options.boot),
-      usage_(options.file, options.folders, capOf(options)) {
+      usage_(options.file, options.folders, capOf(options)),
+      pace_(options.commitWindow, options.fewestWaiting) {
   file_.setLogLimit(logLimit(options));
 }
 
@@ -173,6 +174,7 @@ Result<std::size_t> EventWriter::writeOnce(const EventBatch& batch, std::size_t 
   if (auto error = openOnce(); error.failed()) return {0, error};
   // What the commit before left in doubt began at the same event.
   if (const std::int64_t in = file_.takeRowsInDoubt(); in > 0) return {static_cast<std::size_t>(in)};
+  const auto begun = clock_.monotonic();
   Status error = file_.begin();
   const SteadyClock::time_point start = SteadyClock::now();
   const auto most = static_cast<std::size_t>(transactionBytes(options_));
@@ -192,10 +194,13 @@ Result<std::size_t> EventWriter::writeOnce(const EventBatch& batch, std::size_t 
   if (error.ok()) {
     error = file_.expire(SteadyClock::now() + kExpireTime);
   }
+  const auto written = clock_.monotonic();
   if (error.ok()) {
     error = file_.commit();
   }
-  return {error.failed() ? 0 : next - from, error};
+  if (error.failed()) return {0, error};
+  pace_.note(next - from, written - begun, clock_.monotonic() - written);
+  return {next - from};
 }
 
 // The two events of a message carry one payload, which becomes text once.

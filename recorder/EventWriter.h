@@ -25,12 +25,13 @@
 #include "platform/Clock.h"
 #include "platform/Log.h"
 #include "plist/Result.h"
+#include "recorder/CommitPace.h"
 #include "recorder/RecorderLog.h"
 #include "recorder/RecorderOptions.h"
 #include "recorder/store/CarryOver.h"
 #include "recorder/store/EventBatch.h"
 #include "recorder/store/EventFile.h"
-#include "recorder/store/StateUsage.h"
+#include "recorder/store/files/StateUsage.h"
 
 namespace tarn::recorder {
 
@@ -71,6 +72,8 @@ class EventWriter {
   bool hasMoreToBringIn() const noexcept { return file_.isOpen() && file_.hasMoreToBringIn(); }
   // Events removed by retention since the start.
   std::uint64_t expired() const noexcept { return file_.expired(); }
+  // How fast it goes.
+  const CommitPace& pace() const noexcept { return pace_; }
   const std::string& problem() const noexcept { return problem_; }
 
  private:
@@ -103,6 +106,7 @@ class EventWriter {
   // What it writes to, and what else lies beside that under the same cap.
   EventFile file_;
   StateUsage usage_;
+  CommitPace pace_;
   plist::Dictionary lastPayload_;  // whose text payloadText_ is
   std::string payloadText_ = "{}";
   // Kept for its room.

@@ -132,6 +132,7 @@ class Recorder {
   void noteUse() noexcept TARN_REQUIRES(mutex_);
   // Since when the oldest event waits, after some were committed.
   void noteOldest() TARN_REQUIRES(mutex_);
+  void notePace() TARN_REQUIRES(mutex_);
   bool hasRoom() const TARN_REQUIRES(mutex_);
   // So many are committed: the counts, those who wait, and the room handler where there is room again.
   void account(std::size_t events, std::size_t bytes) TARN_REQUIRES(mutex_);
@@ -181,6 +182,7 @@ class Recorder {
   std::int64_t lastId_ TARN_GUARDED_BY(mutex_) = 0;  // of the last committed event
   bool countsOpen_ TARN_GUARDED_BY(mutex_) = false;
   bool busy_ TARN_GUARDED_BY(mutex_) = false;          // the last group was large
+  std::size_t most_ TARN_GUARDED_BY(mutex_);           // events that may wait, at the pace of the last commits
   std::uint64_t awaited_ TARN_GUARDED_BY(mutex_) = 0;  // handed over before the last flush() or settle()
   std::deque<Settling> settling_ TARN_GUARDED_BY(mutex_);
   bool asleep_ TARN_GUARDED_BY(mutex_) = false;  // the writer waits for the first event of a group

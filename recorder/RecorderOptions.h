@@ -37,14 +37,18 @@ struct RecorderOptions {
   std::size_t groupBytes = std::size_t{4} << 20;
 
   // Waiting events: from the high marks on isFull() is true, from three quarters of them on isCrowded(), until both low
-  // marks are reached. They are low enough for what waits to be written within the time that a crash may cost.
+  // marks are reached.
   std::size_t highWaterEvents = 16'384;
   std::size_t lowWaterEvents = 8'192;
   std::size_t highWaterBytes = std::size_t{16} << 20;
   std::size_t lowWaterBytes = std::size_t{8} << 20;
 
-  // From this age of the oldest waiting event on isFull() is true too: with the time of a commit it is within what a
-  // crash may cost.
+  // The high mark is lower while disk or processor are slow: as many events as are committed in this time, at the pace
+  // that is measured, but so many at the least. What a crash may cost is 200 ms; the rest is for a pace that changes.
+  std::chrono::milliseconds commitWindow{120};
+  std::size_t fewestWaiting = 256;
+
+  // From this age of the oldest waiting event on isFull() is true too: no pace tells that a commit will stall.
   std::chrono::milliseconds oldestWaiting{100};
 
   // How often a piece of the file is compared with its checksums, and for how long: half of a hundredth of the time.

@@ -31,6 +31,7 @@
 #include "recorder/store/Retention.h"
 #include "recorder/store/Statement.h"
 #include "recorder/store/StoreCheck.h"
+#include "recorder/store/files/StoreFiles.h"
 
 namespace tarn::recorder {
 
@@ -39,7 +40,7 @@ class EventFile {
   // `boot` tells this boot of the system from others; the clock outlives this. Nothing is opened.
   EventFile(std::filesystem::path path, const RetentionLimits& limits, const platform::Clock& clock, std::string boot);
 
-  const std::filesystem::path& path() const noexcept { return path_; }
+  const std::filesystem::path& path() const noexcept { return files_.path(); }
 
   // The last id that an earlier run is known to have committed, from which open() tells what is missing. Before the
   // first open().
@@ -97,7 +98,7 @@ class EventFile {
   // that somebody took away.
   std::int64_t takeGoneUpTo() noexcept { return std::exchange(goneUpTo_, 0); }
   // What was put out of the way to open the file, by its new name.
-  std::vector<std::string> takePutAside() noexcept { return std::exchange(putAside_, {}); }
+  std::vector<std::string> takePutAside() noexcept { return files_.takePutAside(); }
 
   // Compares rows with their checksums, from where it stopped until the deadline. Nothing when all is well so far;
   // damage as an error. A reading error too; then the check starts again.
@@ -124,21 +125,9 @@ class EventFile {
   bool hasMoreToBringIn() const noexcept { return logPages_ * pageBytes_ >= logLimit_; }
 
  private:
-  struct Identity {
-    std::uint64_t device = 0;
-    std::uint64_t inode = 0;
-    friend bool operator==(const Identity&, const Identity&) = default;
-  };
-
-  [[nodiscard]] Result<Identity> readIdentity() const;
-  [[nodiscard]] Status checkPath();
-  [[nodiscard]] Status putOddCompanionsAside();
   [[nodiscard]] Status checkLog();
-  [[nodiscard]] Status checkIndex() const;
-  std::int64_t indexBytes() const;
   [[nodiscard]] Status insertAs(std::int64_t id, const StoredEvent& event, Statement& statement);
   [[nodiscard]] int writeGroup();
-  std::filesystem::path freeName(const std::string& suffix) const;
   [[nodiscard]] Status openConnection();
   [[nodiscard]] Status checkContent();
   // What the file holds of a commit that failed, made safe before it counts.
@@ -146,8 +135,7 @@ class EventFile {
   [[nodiscard]] Status prepareStatements();
   void finalizeStatements() noexcept;
 
-  const std::filesystem::path path_;
-  const platform::Clock& clock_;
+  StoreFiles files_;
   Connection connection_;
   Checkpointer checkpointer_;
   // Prepared once for each opening: these run with every commit, or every event.
@@ -161,10 +149,8 @@ class EventFile {
   Retention retention_;
   StoreCheck check_{connection_};
   RecorderTime time_;
-  EventGroup group_;         // of the events since the last one that was full
-  std::string groupHashes_;  // while it is written
-  Identity opened_;
-  Identity checked_;          // the file that was last read through and found good
+  EventGroup group_;          // of the events since the last one that was full
+  std::string groupHashes_;   // while it is written
   std::int64_t lastId_ = 0;   // of the last committed event, in this file or in those before it
   std::int64_t nextId_ = 1;   // inside a transaction
   std::int64_t inDoubt_ = 0;  // rows of a commit that failed, which would follow lastId_
@@ -174,10 +160,6 @@ class EventFile {
   std::int64_t expected_ = 0;   // that the file holds, before it was opened
   std::int64_t goneUpTo_ = 0;
   std::optional<IdRange> missing_;
-  std::vector<std::string> putAside_;
-  std::uint64_t tornBefore_ = 0;  // mappings torn before the file was opened
-  std::int64_t indexBytes_ = 0;   // of the log's index when the transaction began
-  std::uint64_t logInode_ = 0;    // of the write-ahead log after the last commit
   std::int64_t pageBytes_ = 8192;
   std::int64_t logLimit_ = std::int64_t{8} << 20;
   bool bringInFailed_ = false;  // the last time that the log was to be brought in, whatever was opened since

@@ -7,8 +7,8 @@
 #include <cerrno>
 #include <string_view>
 
-#include "tests/recorder/ChildProcess.h"
 #include "tests/recorder/RecorderFixture.h"
+#include "tests/recorder/faults/ChildProcess.h"
 
 namespace tarn::recorder {
 namespace {

@@ -1,4 +1,4 @@
-#include "recorder/store/StateUsage.h"
+#include "recorder/store/files/StateUsage.h"
 
 #include <sys/stat.h>
 #include <sys/sysmacros.h>
