@@ -1,6 +1,7 @@
 // The Rtc worker on a service that answers late, twice, never, or when nobody is there any more.
 #include <chrono>
 
+#include "telemetry/rtc/TarnReportingRtcMirror.h"
 #include "testing/backends/ReplyFaults.h"
 #include "tests/telemetry/rtc/RtcFixture.h"
 
