@@ -15,7 +15,9 @@
 #include <array>
 #include <cstddef>
 #include <cstdint>
+#include <limits>
 #include <memory>
+#include <optional>
 
 #include "platform/OverflowStore.h"
 #include "plist/Dictionary.h"
@@ -55,11 +57,11 @@ class TarnReportingSessionLogMemory {
 
   // A place in a row of lists of about the same size.
   struct Link {
-    List* previous = nullptr;
+    List** row = nullptr;  // null: in none
+    List** at = nullptr;   // what points to the list: the row, or the link of the list before
     List* next = nullptr;
-    int row = -1;  // none
   };
-  static constexpr int kRows = 64;
+  static constexpr std::size_t kRows = std::numeric_limits<std::size_t>::digits + 1;
   static constexpr std::size_t kKnownShapes = 1024;
 
   // What a record takes, its share of keys included.
@@ -70,12 +72,12 @@ class TarnReportingSessionLogMemory {
   void relieve(List& list);
   bool relieveLargest();
   std::size_t bytesInMemory() const noexcept { return bytes_ + pageCounts_->bytesInMemory; }
-  bool mayTry() const noexcept { return store_ != nullptr && bytesInMemory() >= retryAt_; }
+  bool mayTry() const noexcept { return store_ != nullptr && (!retryAt_ || bytesInMemory() >= *retryAt_); }
   void toldFailure(const Error& error);
   void toldSuccess();
-  // Puts the list into the row of its size.
+  // Puts the list into the row of its size; an empty one into none.
   void place(List& list) noexcept;
-  void unplace(List& list) noexcept;
+  static void point(List** at, List* list) noexcept;
 
   platform::OverflowStore* const store_;
   const platform::OverflowStore::Bounds bounds_;
@@ -83,8 +85,7 @@ class TarnReportingSessionLogMemory {
   std::size_t bytes_ = 0;
   std::size_t overflowing_ = 0;
   std::uint64_t failures_ = 0;
-  bool failing_ = false;
-  std::size_t retryAt_ = 0;
+  std::optional<std::size_t> retryAt_;  // bytes in memory, after a failure
   const std::shared_ptr<Page::Counts> pageCounts_ = std::make_shared<Page::Counts>();
   std::array<List*, kRows> rows_{};
   // Key lists are shared by all messages of a shape: who brings one that wasn't seen lately pays for it.
