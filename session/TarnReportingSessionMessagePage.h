@@ -36,7 +36,7 @@ class TarnReportingSessionMessagePage {
     Maker& operator=(const Maker&) = delete;
 
     void add(const TarnReportingSessionMessage& record);
-    // The page, which lies in the store; nothing is kept after an error.
+    // The page, which lies in the store; nothing is kept after an error. Once.
     Result<std::shared_ptr<const TarnReportingSessionMessagePage>> finish(platform::OverflowStore& store,
                                                                           const std::shared_ptr<Counts>& counts);
     // The page when that went wrong: it stays in memory.
@@ -53,7 +53,6 @@ class TarnReportingSessionMessagePage {
     double firstTime_ = 0;
     double lastTime_ = 0;
     bool isSorted_ = true;
-    bool isSealed_ = false;
   };
 
   TarnReportingSessionMessagePage(const TarnReportingSessionMessagePage&) = delete;
@@ -74,8 +73,8 @@ class TarnReportingSessionMessagePage {
   Result<std::vector<Record>> tryToRead() const;
 
   platform::OverflowStore* store_ = nullptr;  // null: the image is in memory
-  platform::OverflowStore::Place place_ = 0;
-  std::size_t storedBytes_ = 0;
+  platform::OverflowStore::Place place_{};
+  std::size_t storedBytes_{};
   std::shared_ptr<Counts> counts_;
   std::string image_;
   std::vector<TarnReportingSessionMessage::DestinationWorkers> destinations_;
