@@ -15,7 +15,9 @@
 #include <array>
 #include <cstddef>
 #include <cstdint>
+#include <limits>
 #include <memory>
+#include <optional>
 
 #include "platform/OverflowStore.h"
 #include "plist/Dictionary.h"
@@ -59,12 +61,12 @@ class TarnReportingSessionLogMemory {
 
   // A place in a row of lists of about the same size.
   struct Link {
-    List* previous = nullptr;
+    List** row = nullptr;  // null: in none
+    List** at = nullptr;   // what points to the list: the row, or the link of the list before
     List* next = nullptr;
-    int row = -1;  // none
   };
   // One for each power of two that a size may have.
-  static constexpr int kRows = 64;
+  static constexpr std::size_t kRows = std::numeric_limits<std::size_t>::digits + 1;
   // As many shapes as a connection may declare; a slot holds one, and two that share a slot pay for their keys in
   // turns.
   static constexpr std::size_t kKnownShapes = 1024;
@@ -82,14 +84,14 @@ class TarnReportingSessionLogMemory {
   // Pages count that the store had no room for.
   std::size_t bytesInMemory() const noexcept { return bytes_ + pageCounts_->bytesInMemory; }
   // After a failure not before memory has grown by a further mebibyte, or a full disk would be asked for every message.
-  bool mayTry() const noexcept { return store_ != nullptr && bytesInMemory() >= retryAt_; }
+  bool mayTry() const noexcept { return store_ != nullptr && (!retryAt_ || bytesInMemory() >= *retryAt_); }
   // An error line for the first of failures in a row, and one more line when the store takes messages again.
   void toldFailure(const Error& error);
   // From then on it is tried again whenever a bound is exceeded.
   void toldSuccess();
-  // Puts the list into the row of its size.
+  // Puts the list into the row of its size; an empty one into none.
   void place(List& list) noexcept;
-  void unplace(List& list) noexcept;
+  static void point(List** at, List* list) noexcept;
 
   platform::OverflowStore* const store_;
   const platform::OverflowStore::Bounds bounds_;
@@ -99,9 +101,8 @@ class TarnReportingSessionLogMemory {
   std::size_t bytes_ = 0;
   std::size_t overflowing_ = 0;
   std::uint64_t failures_ = 0;
-  // The last attempt failed; `retryAt_` is the memory in bytes at which the next one is made.
-  bool failing_ = false;
-  std::size_t retryAt_ = 0;
+  // The last attempt failed; the memory in bytes at which the next one is made.
+  std::optional<std::size_t> retryAt_;
   const std::shared_ptr<Page::Counts> pageCounts_ = std::make_shared<Page::Counts>();
   // The first list of each row; lists link themselves.
   std::array<List*, kRows> rows_{};

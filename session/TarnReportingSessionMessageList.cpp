@@ -49,9 +49,7 @@ void TarnReportingSessionMessageList::takeFrom(TarnReportingSessionMessageList& 
   overflowed_ = std::exchange(other.overflowed_, 0);
   parts_.swap(other.parts_);
   opened_.swap(other.opened_);
-  changes_ = other.changes_;
   if (memory_) {
-    memory_->place(other);
     memory_->place(*this);
   }
 }
@@ -117,9 +115,6 @@ std::vector<std::shared_ptr<const TarnReportingSessionMessagePage>> TarnReportin
 }
 
 std::size_t TarnReportingSessionMessageList::partOf(std::size_t index) const noexcept {
-  for (const Opened& opened : opened_) {
-    if (opened.part != kNone && index - opened.first < opened.records.size()) return opened.part;
-  }
   const auto behind = std::upper_bound(parts_.begin(), parts_.end(), index,
                                        [](std::size_t place, const Part& part) { return place < part.first; });
   return static_cast<std::size_t>(behind - parts_.begin()) - 1;
@@ -165,7 +160,7 @@ void TarnReportingSessionMessageList::closePart(Opened& opened) const {
 void TarnReportingSessionMessageList::noteChange(std::size_t index) const {
   ++changes_;
   for (Opened& opened : opened_) {
-    if (opened.part != kNone && index - opened.first < opened.records.size()) {
+    if (index - opened.first < opened.records.size()) {
       opened.isChanged = true;
     }
   }
@@ -201,7 +196,7 @@ bool TarnReportingSessionMessageList::moveOldest() {
 }
 
 void TarnReportingSessionMessageList::moveAll() {
-  while (memory_ && memory_->mayTry() && moveOldest()) {
+  while (memory_->mayTry() && moveOldest()) {
   }
 }
 
@@ -240,7 +235,7 @@ bool TarnReportingSessionMessageList::isSorted() const {
 
 // Cuts the list into lists that are sorted, and leaves nothing in it.
 std::vector<TarnReportingSessionMessageList> TarnReportingSessionMessageList::sortedRuns() {
-  const std::size_t longest = std::max<std::size_t>(1, memory_->chunkBytes_ * kChunksOfRun);
+  const std::size_t longest = memory_->chunkBytes_ * kChunksOfRun;
   std::vector<TarnReportingSessionMessageList> runs;
   TarnReportingSessionMessages run;
   std::size_t bytes = 0;

@@ -174,59 +174,44 @@ class TarnReportingSessionMessageList {
 // Goes through the records that can be read. What it shows holds until it goes on to the page after the next.
 class TarnReportingSessionMessageList::Iterator {
  public:
-  using value_type = Record;
-  using reference = const Record&;
-  using difference_type = std::ptrdiff_t;
-  using iterator_concept = std::input_iterator_tag;
-
-  Iterator(Iterator&& other) noexcept : list_(std::exchange(other.list_, nullptr)), index_(other.index_) {}
-  Iterator& operator=(Iterator&& other) noexcept {
-    std::swap(list_, other.list_);
-    std::swap(index_, other.index_);
-    return *this;
-  }
   Iterator(const Iterator&) = delete;
   Iterator& operator=(const Iterator&) = delete;
-  ~Iterator() {
-    if (list_ != nullptr) {
-      --list_->pins_;
-    }
-  }
+  ~Iterator() { --list_.pins_; }
 
   // Records that can't be read back are skipped on the way, so this one is there.
-  reference operator*() const { return list_->look(index_); }
-  const Record* operator->() const { return &list_->look(index_); }
+  const Record& operator*() const { return list_.look(index_); }
+  const Record* operator->() const { return &list_.look(index_); }
   Iterator& operator++() {
     ++index_;
     skipLost();
     return *this;
   }
-  void operator++(int) { ++*this; }
-  friend bool operator==(const Iterator& at, std::default_sentinel_t) { return at.index_ >= at.list_->size(); }
+  friend bool operator==(const Iterator& at, std::default_sentinel_t) { return at.index_ >= at.list_.size(); }
 
   // The record's place in the list.
   std::size_t index() const noexcept { return index_; }
   // Whether the record is the first of its page, or the first behind the pages: what was shown of the page before goes.
   bool beginsPage() const noexcept {
-    if (index_ > list_->overflowed_ || list_->overflowed_ == 0) return false;
-    return index_ == list_->overflowed_ || list_->parts_[list_->partOf(index_)].first == index_;
+    return index_ <= list_.overflowed_ &&
+           (index_ == list_.overflowed_ || list_.parts_[list_.partOf(index_)].first == index_);
   }
 
  private:
   friend class TarnReportingSessionMessageList;
-  explicit Iterator(const TarnReportingSessionMessageList& list) : list_(&list) {
-    ++list_->pins_;
+  explicit Iterator(const TarnReportingSessionMessageList& list) : list_(list) {
+    ++list_.pins_;
     skipLost();
   }
   // Goes past the pages that can't be read back.
   void skipLost() {
-    while (index_ < list_->overflowed_ && !list_->look(index_)) {
-      const std::size_t part = list_->partOf(index_);
-      index_ = list_->parts_[part].first + list_->parts_[part].page->size();
+    while (index_ < list_.overflowed_) {
+      const std::size_t part = list_.partOf(index_);
+      if (!list_.open(part).records.empty()) break;
+      index_ = list_.parts_[part].first + list_.parts_[part].page->size();
     }
   }
 
-  const TarnReportingSessionMessageList* list_;
+  const TarnReportingSessionMessageList& list_;
   std::size_t index_ = 0;
 };
 

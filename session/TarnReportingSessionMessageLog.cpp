@@ -1,7 +1,5 @@
 #include "session/TarnReportingSessionMessageLog.h"
 
-#include <utility>
-
 namespace tarn {
 
 namespace {
@@ -32,7 +30,8 @@ void TarnReportingSessionMessageLog::note(Newest& newest, std::size_t index,
 
 void TarnReportingSessionMessageLog::sort() {
   if (!messages_.sort()) return;
-  forgetKept();
+  newest_.clear();  // of kinds of which nothing can be read back, nothing is left
+  kept_ = 0;
   for (auto at = messages_.begin(); at != messages_.end(); ++at) {
     note(newest_[keyOf((*at)->category(), (*at)->type())], at.index(), at->get());
   }
@@ -58,7 +57,7 @@ const TarnReportingSessionMessage* TarnReportingSessionMessageLog::newest(AudioE
   }
   if (newest.kept) return newest.kept.get();
   looked_ = messages_[newest.index];
-  if (kept_ < kMostKept && looked_) {
+  if (looked_ && kept_ < kMostKept) {
     newest.kept = looked_;
     ++kept_;
   }
@@ -66,10 +65,10 @@ const TarnReportingSessionMessage* TarnReportingSessionMessageLog::newest(AudioE
 }
 
 void TarnReportingSessionMessageLog::forgetKept() const {
-  if (std::exchange(kept_, 0) == 0) return;
   for (auto& [key, newest] : newest_) {
     newest.kept.reset();
   }
+  kept_ = 0;
 }
 
 }  // namespace tarn

@@ -6,6 +6,7 @@
 #include <string_view>
 #include <utility>
 
+#include "plist/Key.h"
 #include "service/vocabulary/TarnReportingLog.h"
 
 namespace tarn {
@@ -17,26 +18,18 @@ constexpr TarnReportingLogger kLog{TarnReportingSessionCategory, "TarnReportingS
 constexpr std::uint8_t kRedundant = 1;
 constexpr std::uint8_t kSessionStarted = 2;
 
-// Sees what a disk did to the bytes.
+// Sees what a disk did to the bytes. It is the same for as long as the process runs, as a page is.
 std::uint64_t checksum(std::string_view bytes) noexcept {
-  constexpr std::uint64_t kFactor = 0x9E3779B97F4A7C15U;
-  std::uint64_t sum = bytes.size();
-  for (std::size_t at = 0; at < bytes.size(); at += sizeof sum) {
-    std::uint64_t word = 0;
-    std::memcpy(&word, bytes.data() + at, std::min(sizeof word, bytes.size() - at));
-    sum = (sum ^ word) * kFactor;
-    sum ^= sum >> 29U;
-  }
-  return sum;
+  return plist::Key::hashOf(bytes);
 }
 
 bool readRecord(plist::PackedImageReader& reader,
                 const std::vector<TarnReportingSessionMessage::DestinationWorkers>& destinations,
                 TarnReportingSessionMessagePage::Record& record) {
-  AudioEventCategory category{};
-  AudioEventType type{};
-  std::uint8_t flags = 0;
-  std::uint32_t destination = 0;
+  AudioEventCategory category;
+  AudioEventType type;
+  std::uint8_t flags;
+  std::uint32_t destination;
   plist::Dictionary payload;
   const bool isWhole = reader.readNumber(category) && reader.readNumber(type) && reader.readNumber(flags) &&
                        reader.readNumber(destination) && destination <= destinations.size() && reader.read(payload);
@@ -80,9 +73,7 @@ std::size_t TarnReportingSessionMessagePage::Maker::numberOf(
 
 Result<std::shared_ptr<const TarnReportingSessionMessagePage>> TarnReportingSessionMessagePage::Maker::finish(
     platform::OverflowStore& store, const std::shared_ptr<Counts>& counts) {
-  if (!std::exchange(isSealed_, true)) {
-    writer_.writeNumber(checksum(image_));
-  }
+  writer_.writeNumber(checksum(image_));
   Result<platform::OverflowStore::Place> written = store.write(image_);
   if (written.failed()) return {nullptr, std::move(written.error)};
   const std::size_t bytes = image_.size();
@@ -143,15 +134,15 @@ Result<std::vector<TarnReportingSessionMessagePage::Record>> TarnReportingSessio
     if (stored.failed()) return {{}, std::move(stored.error)};
   }
   std::string_view image = store_ != nullptr ? std::string_view(stored.value) : std::string_view(image_);
-  std::uint64_t expected = 0;
-  if (image.size() < sizeof expected) return {{}, Error{0, "the page is cut"}};
+  std::uint64_t expected;
+  if (image.size() < sizeof expected) return {{}, Error{.text = "the page is cut"}};
   std::memcpy(&expected, image.data() + image.size() - sizeof expected, sizeof expected);
   image.remove_suffix(sizeof expected);
-  if (checksum(image) != expected) return {{}, Error{0, "the page is damaged"}};
+  if (checksum(image) != expected) return {{}, Error{.text = "the page is damaged"}};
   plist::PackedImageReader reader(image);
   std::vector<Record> records(size_);
   for (Record& record : records) {
-    if (!readRecord(reader, destinations_, record)) return {{}, Error{0, "the page is damaged"}};
+    if (!readRecord(reader, destinations_, record)) return {{}, Error{.text = "the page is damaged"}};
   }
   return {std::move(records), {}};
 }

@@ -42,8 +42,8 @@ class TarnReportingSessionMessagePage {
 
     // Payload, category, type, flags and destinations go into the page; the record's guard and identity don't.
     void add(const TarnReportingSessionMessage& record);
-    // The page, which lies in the store; nothing is kept after an error. The error is the store's. The image is still
-    // here then, for finishInMemory().
+    // The page, which lies in the store; nothing is kept after an error. Once. The error is the store's. The image is
+    // still here then, for finishInMemory().
     Result<std::shared_ptr<const TarnReportingSessionMessagePage>> finish(platform::OverflowStore& store,
                                                                           const std::shared_ptr<Counts>& counts);
     // The page when that went wrong: it stays in memory.
@@ -62,7 +62,6 @@ class TarnReportingSessionMessagePage {
     double firstTime_ = 0;
     double lastTime_ = 0;
     bool isSorted_ = true;
-    bool isSealed_ = false;
   };
 
   TarnReportingSessionMessagePage(const TarnReportingSessionMessagePage&) = delete;
@@ -90,9 +89,9 @@ class TarnReportingSessionMessagePage {
   Result<std::vector<Record>> tryToRead() const;
 
   platform::OverflowStore* store_ = nullptr;  // null: the image is in memory
-  platform::OverflowStore::Place place_ = 0;
+  platform::OverflowStore::Place place_{};
   // What it takes in the store, told back to the counts at its end.
-  std::size_t storedBytes_ = 0;
+  std::size_t storedBytes_{};
   std::shared_ptr<Counts> counts_;
   // The records one after the other, then the checksum; empty when the store has it.
   std::string image_;

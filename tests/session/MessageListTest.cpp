@@ -2,15 +2,11 @@
 
 #include <algorithm>
 #include <memory>
-#include <numeric>
 #include <random>
 #include <string>
 #include <vector>
 
-#include "service/vocabulary/ProcessState.h"
-#include "service/vocabulary/TarnReportingPlatform.h"
-#include "session/TarnReportingSessionMessageList.h"
-#include "testing/FakePlatform.h"
+#include "tests/session/MessageListFixture.h"
 #include "tests/support/Seeds.h"
 
 namespace tarn {
@@ -18,37 +14,12 @@ namespace {
 
 using namespace testing;
 
-constexpr std::size_t kNoBound = std::size_t{1} << 40U;
-
-class MessageList : public ::testing::Test {
+class MessageList : public MessageListFixture {
  protected:
-  using List = TarnReportingSessionMessageList;
-  using Record = List::Record;
-
-  // Message number n of that time.
-  static Record numbered(int n, double time) {
-    return std::make_shared<TarnReportingSessionMessage>(plist::Dictionary{{"n", n}, {"tarnreporting_timestamp", time}},
-                                                         AudioEventCategory::Playback, AudioEventType::State);
-  }
   static void fill(List& list, int count, int from = 0) {
     for (int n = from; n < from + count; ++n) {
       list.append(numbered(n, n));
     }
-  }
-  static std::vector<std::int64_t> numbers(const List& list) {
-    std::vector<std::int64_t> numbers;
-    for (const Record& record : list) {
-      numbers.push_back(record->message().get("n").asInt64());
-    }
-    return numbers;
-  }
-  static std::vector<std::int64_t> upTo(std::int64_t count) {
-    std::vector<std::int64_t> numbers(static_cast<std::size_t>(count));
-    std::iota(numbers.begin(), numbers.end(), 0);
-    return numbers;
-  }
-  static TarnReportingSessionLogMemory::Usage usage() {
-    return ProcessState::of<TarnReportingSessionLogMemory>()->usage();
   }
   // What one of fill()'s messages takes.
   std::size_t costOfOne() {
@@ -58,8 +29,6 @@ class MessageList : public ::testing::Test {
     fill(first, 1);
     return usage().bytes - withShape;
   }
-
-  FakePlatform platform_;
 };
 
 TEST_F(MessageList, NothingIsMovedWithinTheBound) {
@@ -173,7 +142,7 @@ TEST_F(MessageList, MovingAListMovesWhatItCounts) {
   fill(other, 100, 100);
   EXPECT_EQ(numbers(other), upTo(200));
   EXPECT_EQ(before.overflowing, 1U);
-  other = List();
+  other.clear();
   EXPECT_EQ(usage(), TarnReportingSessionLogMemory::Usage{});
 }
 
