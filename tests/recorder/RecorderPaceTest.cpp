@@ -46,20 +46,6 @@ class RecorderPace : public RecorderFixture {
   std::atomic<int> rooms_{0};
 };
 
-TEST_F(RecorderPace, SlowWritingLetsFewerEventsWait) {
-  gatherForLong();
-  startAndRest();
-  // Of a transaction that began to wait for its lock, all is the writing of its events: 0.2 ms each, taken for half.
-  commitSlowly(100, FaultyFiles::Call::ShmLock, milliseconds(20));
-
-  recordMany(1199);
-  EXPECT_FALSE(recorder_->isFull());
-  record("one more");
-  EXPECT_TRUE(recorder_->isFull());
-  ASSERT_TRUE(flush());
-  EXPECT_FALSE(recorder_->isFull());
-}
-
 TEST_F(RecorderPace, NothingComesInWhileASlowCommitIsUnderWay) {
   options_.groupTime = options_.quietTime = milliseconds(1);
   startAndRest();
