@@ -19,13 +19,15 @@ class QuotaUse {
   QuotaUse(const QuotaUse&) = delete;
   QuotaUse& operator=(const QuotaUse&) = delete;
 
-  // The connection has so many sessions, or waiting bytes, by now.
+  // The connection has so many sessions, waiting bytes, or bytes of logs, by now.
   void noteSessions(std::size_t sessions) noexcept;
   void noteWaitingBytes(std::size_t bytes) noexcept;
+  void noteLogBytes(std::size_t bytes) noexcept;
 
   // Why one more is beyond a quota; empty when it is not.
   std::string refusalOfSession() const;
   std::string refusalOfWaitingBytes(std::size_t more) const;
+  std::string refusalOfLog() const;
   // A message that isn't refused counts.
   std::string refusalOfMessage(std::int64_t second);
   bool limitsMessages() const noexcept {
@@ -37,6 +39,7 @@ class QuotaUse {
   const HostLimits::Quotas& quotas_;
   std::size_t sessions_ = 0;  // as the party counts them
   std::size_t waitingBytes_ = 0;
+  std::size_t logBytes_ = 0;
   MessageRate rate_;
 };
 

@@ -62,6 +62,7 @@ class SocketConnection final : public platform::Connection,
   void handleEvents(std::uint32_t events) override;
   void flush() override;
   void endInput() override;
+  void noteLogBytes() override;
   Turn takeTurn(std::int64_t credit) override;
   void finishWork() override;
   void endHalfFrame(const std::string& why) override;
