@@ -30,6 +30,7 @@
 #include "host/machine/LinuxProcessEnvironment.h"
 #include "host/machine/LinuxProcessFacts.h"
 #include "host/machine/LinuxRandomSource.h"
+#include "host/machine/OverflowFile.h"
 #include "host/settings/FileNotificationCenter.h"
 #include "host/settings/HostConfiguration.h"
 #include "host/settings/JsonDefaultsStore.h"
@@ -113,6 +114,7 @@ class LinuxPlatform final : private platform::ProcessControl {
   platform::UniqueFunction<void()> settleLog_;
   MainLoop loop_;
   ConnectionHost connections_;
+  OverflowFile overflow_;
   const bool recorderEnabled_;  // false: it never starts, and no stand-in is handed out
   recorder::Recorder recorder_;
   LinuxWorkQueues workQueues_;
