@@ -86,7 +86,7 @@ Result<std::shared_ptr<const TarnReportingSessionMessagePage>> TarnReportingSess
   Result<platform::OverflowStore::Place> written = store.write(image_);
   if (written.failed()) return {nullptr, std::move(written.error)};
   const std::size_t bytes = image_.size();
-  image_ = std::string();
+  std::string().swap(image_);  // an assignment would keep the room, and the page with it
   const auto page = makePage(counts);
   page->store_ = &store;
   page->place_ = written.value;
