@@ -8,6 +8,7 @@
 #pragma once
 
 #include <atomic>
+#include <cstdint>
 #include <deque>
 #include <memory>
 #include <string>
@@ -28,6 +29,8 @@ class TARN_CAPABILITY TarnReportingSessionMessage {
  public:
   // Names of worker classes; the texts are static.
   using DestinationWorkers = std::vector<std::string_view>;
+  // Category and type in one number.
+  using Kind = std::uint64_t;
 
   TarnReportingSessionMessage(plist::Dictionary message, AudioEventCategory category, AudioEventType type)
       : message_(std::move(message)), category_(category), type_(type) {}
@@ -38,6 +41,10 @@ class TARN_CAPABILITY TarnReportingSessionMessage {
   plist::Dictionary& mutableMessage() noexcept { return message_; }
   AudioEventCategory category() const noexcept { return category_; }
   AudioEventType type() const noexcept { return type_; }
+  Kind kind() const noexcept { return kindOf(category_, type_); }
+  static Kind kindOf(AudioEventCategory category, AudioEventType type) noexcept {
+    return Kind{static_cast<std::uint32_t>(category)} << 16U | static_cast<std::uint16_t>(type);
+  }
 
   // Whether the message repeats an earlier one of its session.
   bool isRedundant() const noexcept { return isRedundant_; }

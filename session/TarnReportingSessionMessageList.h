@@ -53,7 +53,7 @@ class TarnReportingSessionMessageList {
   bool sort();
   void clear();
 
-  std::size_t size() const noexcept { return overflowed_ + recent_.size(); }
+  std::size_t size() const noexcept { return overflowed_ + (recent_ ? recent_->size() : 0); }
   bool empty() const noexcept { return size() == 0; }
   // The record; null for one that can't be read back.
   Record operator[](std::size_t index) const;
@@ -73,6 +73,10 @@ class TarnReportingSessionMessageList {
       noteChange(index);
     }
   }
+  // Calls take(index, record) from the last record to the first until it returns false. Pages of which wants(kind) is
+  // true for none of the kinds are passed over.
+  template <class Wants, class Take>
+  void goBack(const Wants& wants, Take take) const;
   // How often records of pages were changed in place.
   std::uint64_t changes() const noexcept { return changes_; }
 
@@ -81,7 +85,7 @@ class TarnReportingSessionMessageList {
   // The pages as they are now, without those that couldn't be read back.
   std::vector<std::shared_ptr<const Page>> pages() const;
   // The records behind them.
-  const TarnReportingSessionMessages& recent() const noexcept { return recent_; }
+  const TarnReportingSessionMessages& recent() const;
 
  private:
   friend class TarnReportingSessionLogMemory;
@@ -104,6 +108,7 @@ class TarnReportingSessionMessageList {
     std::size_t records = 0;
     std::size_t bytes = 0;
   };
+  struct Run;
   static constexpr std::size_t kNone = static_cast<std::size_t>(-1);
 
   // The record; the reference holds until the second other page is read. Null for one that can't be read back.
@@ -115,12 +120,14 @@ class TarnReportingSessionMessageList {
 
   // Moves the oldest records in memory to the store; false when that is not possible now.
   bool moveOldest();
-  void moveAll();
+  // Whether all are there then.
+  bool moveAll();
+  void addPart(std::shared_ptr<const Page> page);
   void tellOverflow();
-  void dropPart(std::size_t part);
   bool isSorted() const;
-  std::vector<TarnReportingSessionMessageList> sortedRuns();
-  void merge(std::vector<TarnReportingSessionMessageList>& runs);
+  void sortPages();
+  std::vector<Run> sortedRuns(std::vector<std::shared_ptr<const Page>> pages) const;
+  void merge(std::vector<Run>& runs);
   void takeFrom(TarnReportingSessionMessageList& other) noexcept;
 
   std::optional<std::int64_t> reporterID_;  // of a session's log
@@ -130,7 +137,8 @@ class TarnReportingSessionMessageList {
   mutable int pins_ = 0;  // loops that go on; nothing is moved meanwhile
   bool isTold_ = false;
 
-  TarnReportingSessionMessages recent_;
+  // Made with the first: most sessions of a client that has thousands never get a message.
+  std::unique_ptr<TarnReportingSessionMessages> recent_;
   std::size_t bytes_ = 0;
   std::vector<Chunk> chunks_;  // of recent_, those that are complete
   std::size_t firstChunk_ = 0;
@@ -198,13 +206,27 @@ class TarnReportingSessionMessageList::Iterator {
   std::size_t index_ = 0;
 };
 
+template <class Wants, class Take>
+void TarnReportingSessionMessageList::goBack(const Wants& wants, Take take) const {
+  for (std::size_t index = size(); index > overflowed_; --index) {
+    if (!take(index - 1, (*recent_)[index - 1 - overflowed_])) return;
+  }
+  for (std::size_t part = parts_.size(); part > 0; --part) {
+    if (!parts_[part - 1].page->contents().mayHave(wants)) continue;
+    const Opened& opened = open(part - 1);
+    for (std::size_t index = opened.records.size(); index > 0; --index) {
+      if (!take(opened.first + index - 1, opened.records[index - 1])) return;
+    }
+  }
+}
+
 inline TarnReportingSessionMessageList::Iterator TarnReportingSessionMessageList::begin() const {
   return Iterator(*this);
 }
 
 inline const TarnReportingSessionMessageList::Record& TarnReportingSessionMessageList::look(std::size_t index) const {
   if (index >= overflowed_) [[likely]] {
-    return recent_[index - overflowed_];
+    return (*recent_)[index - overflowed_];
   }
   static const Record kLost;
   const Opened& opened = open(partOf(index));

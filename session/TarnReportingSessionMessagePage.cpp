@@ -1,6 +1,7 @@
 #include "session/TarnReportingSessionMessagePage.h"
 
 #include <algorithm>
+#include <array>
 #include <cstdint>
 #include <cstring>
 #include <string_view>
@@ -16,16 +17,30 @@ constexpr TarnReportingLogger kLog{TarnReportingSessionCategory, "TarnReportingS
 
 constexpr std::uint8_t kRedundant = 1;
 constexpr std::uint8_t kSessionStarted = 2;
+// Of a page; a client that has more of them within a few hundred messages doesn't make pages larger.
+constexpr std::size_t kMostKinds = 64;
 
-// Sees what a disk did to the bytes.
-std::uint64_t checksum(std::string_view bytes) noexcept {
+std::uint64_t mixed(std::uint64_t sum, std::uint64_t word) noexcept {
   constexpr std::uint64_t kFactor = 0x9E3779B97F4A7C15U;
-  std::uint64_t sum = bytes.size();
-  for (std::size_t at = 0; at < bytes.size(); at += sizeof sum) {
-    std::uint64_t word = 0;
-    std::memcpy(&word, bytes.data() + at, std::min(sizeof word, bytes.size() - at));
-    sum = (sum ^ word) * kFactor;
-    sum ^= sum >> 29U;
+  sum = (sum ^ word) * kFactor;
+  return sum ^ sum >> 29U;
+}
+
+// Sees what a disk did to the bytes. Four sums side by side, since each step of one waits for its multiplication.
+std::uint64_t checksum(std::string_view bytes) noexcept {
+  std::array<std::uint64_t, 4> sums{bytes.size(), 1, 2, 3};
+  std::array<std::uint64_t, 4> words{};
+  for (; bytes.size() >= sizeof words; bytes.remove_prefix(sizeof words)) {
+    std::memcpy(words.data(), bytes.data(), sizeof words);
+    for (std::size_t lane = 0; lane < sums.size(); ++lane) {
+      sums[lane] = mixed(sums[lane], words[lane]);
+    }
+  }
+  words = {};
+  std::memcpy(words.data(), bytes.data(), bytes.size());
+  std::uint64_t sum = 0;
+  for (std::size_t lane = 0; lane < sums.size(); ++lane) {
+    sum = mixed(sum, mixed(sums[lane], words[lane]));
   }
   return sum;
 }
@@ -54,16 +69,32 @@ bool readRecord(plist::PackedImageReader& reader,
 
 void TarnReportingSessionMessagePage::Maker::add(const TarnReportingSessionMessage& record) {
   const double time = record.sortingTime();
-  isSorted_ = isSorted_ && (size_ == 0 || lastTime_ <= time);
-  firstTime_ = size_ == 0 ? time : firstTime_;
+  if (contents_.records++ == 0) {
+    contents_.earliest = contents_.latest = time;
+  } else {
+    contents_.isSorted = contents_.isSorted && lastTime_ <= time;
+    contents_.earliest = std::min(contents_.earliest, time);
+    contents_.latest = std::max(contents_.latest, time);
+  }
   lastTime_ = time;
-  ++size_;
+  noteKind(record.kind());
   const int flags = (record.isRedundant() ? kRedundant : 0) | (record.isSessionStarted() ? kSessionStarted : 0);
   writer_.writeNumber(record.category());
   writer_.writeNumber(record.type());
   writer_.writeNumber(static_cast<std::uint8_t>(flags));
   writer_.writeNumber(static_cast<std::uint32_t>(numberOf(record.destinationWorkers())));
   writer_.write(record.message());
+}
+
+void TarnReportingSessionMessagePage::Maker::noteKind(TarnReportingSessionMessage::Kind kind) {
+  std::vector<TarnReportingSessionMessage::Kind>& kinds = contents_.kinds;
+  if (contents_.mayHave([kind](TarnReportingSessionMessage::Kind each) { return each == kind; })) return;
+  if (kinds.size() == kMostKinds) {
+    contents_.hasManyKinds = true;
+    kinds = {};
+    return;
+  }
+  kinds.push_back(kind);
 }
 
 // Messages go to few sets of workers, whose names are static texts: they needn't be written.
@@ -110,10 +141,7 @@ std::shared_ptr<TarnReportingSessionMessagePage> TarnReportingSessionMessagePage
   page->image_ = std::move(image_);
   counts->bytesInMemory += page->image_.size();
   page->destinations_ = std::move(destinations_);
-  page->size_ = size_;
-  page->firstTime_ = firstTime_;
-  page->lastTime_ = lastTime_;
-  page->isSorted_ = isSorted_;
+  page->contents_ = std::move(contents_);
   return page;
 }
 
@@ -130,8 +158,8 @@ std::vector<TarnReportingSessionMessagePage::Record> TarnReportingSessionMessage
     records = tryToRead();  // a fault may have been the moment's
   }
   if (records.failed()) {
-    counts_->recordsLost += size_;
-    kLog(LogLevel::Error, "%lu messages of a log can't be read back: %@", size_, records.error->text);
+    counts_->recordsLost += size();
+    kLog(LogLevel::Error, "%lu messages of a log can't be read back: %@", size(), records.error->text);
   }
   return std::move(records.value);
 }
@@ -149,7 +177,7 @@ Result<std::vector<TarnReportingSessionMessagePage::Record>> TarnReportingSessio
   image.remove_suffix(sizeof expected);
   if (checksum(image) != expected) return {{}, Error{0, "the page is damaged"}};
   plist::PackedImageReader reader(image);
-  std::vector<Record> records(size_);
+  std::vector<Record> records(size());
   for (Record& record : records) {
     if (!readRecord(reader, destinations_, record)) return {{}, Error{0, "the page is damaged"}};
   }

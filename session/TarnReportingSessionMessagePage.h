@@ -4,6 +4,7 @@
 // Threads: any.
 #pragma once
 
+#include <algorithm>
 #include <atomic>
 #include <cstddef>
 #include <cstdint>
@@ -28,6 +29,24 @@ class TarnReportingSessionMessagePage {
     std::atomic<std::uint64_t> recordsLost = 0;  // that couldn't be read back
   };
 
+  // What is known of the records while the page lies in the store.
+  struct Contents {
+    std::size_t records = 0;
+    // By TarnReportingSessionMessage::sortingTime.
+    double earliest = 0;
+    double latest = 0;
+    bool isSorted = true;
+    // The kinds of the records, each once and in no order; of many kinds none is kept.
+    std::vector<TarnReportingSessionMessage::Kind> kinds;
+    bool hasManyKinds = false;
+
+    // Whether wants(kind) may be true for a record's.
+    template <class Wants>
+    bool mayHave(const Wants& wants) const {
+      return hasManyKinds || std::any_of(kinds.rbegin(), kinds.rend(), wants);
+    }
+  };
+
   // Takes records one by one, then makes a page of them.
   class Maker {
    public:
@@ -45,14 +64,13 @@ class TarnReportingSessionMessagePage {
    private:
     std::shared_ptr<TarnReportingSessionMessagePage> makePage(const std::shared_ptr<Counts>& counts);
     std::size_t numberOf(const TarnReportingSessionMessage::DestinationWorkers& destinations);
+    void noteKind(TarnReportingSessionMessage::Kind kind);
 
     std::string image_;
     plist::PackedImageWriter writer_{image_};
     std::vector<TarnReportingSessionMessage::DestinationWorkers> destinations_;
-    std::size_t size_ = 0;
-    double firstTime_ = 0;
+    Contents contents_;
     double lastTime_ = 0;
-    bool isSorted_ = true;
     bool isSealed_ = false;
   };
 
@@ -63,11 +81,8 @@ class TarnReportingSessionMessagePage {
   // The records, made anew by each call. None when they can't be read back, which is counted and logged.
   std::vector<Record> read() const;
 
-  std::size_t size() const noexcept { return size_; }
-  // By TarnReportingSessionMessage::sortingTime.
-  double firstTime() const noexcept { return firstTime_; }
-  double lastTime() const noexcept { return lastTime_; }
-  bool isSorted() const noexcept { return isSorted_; }
+  const Contents& contents() const noexcept { return contents_; }
+  std::size_t size() const noexcept { return contents_.records; }
 
  private:
   TarnReportingSessionMessagePage() = default;
@@ -79,10 +94,7 @@ class TarnReportingSessionMessagePage {
   std::shared_ptr<Counts> counts_;
   std::string image_;
   std::vector<TarnReportingSessionMessage::DestinationWorkers> destinations_;
-  std::size_t size_ = 0;
-  double firstTime_ = 0;
-  double lastTime_ = 0;
-  bool isSorted_ = true;
+  Contents contents_;
 };
 
 }  // namespace tarn
