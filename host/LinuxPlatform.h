@@ -33,6 +33,7 @@
 #include "host/machine/LinuxProcessEnvironment.h"
 #include "host/machine/LinuxProcessFacts.h"
 #include "host/machine/LinuxRandomSource.h"
+#include "host/machine/OverflowFile.h"
 #include "host/settings/FileNotificationCenter.h"
 #include "host/settings/HostConfiguration.h"
 #include "host/settings/JsonDefaultsStore.h"
@@ -134,6 +135,7 @@ class LinuxPlatform final : private platform::ProcessControl {
   MainLoop loop_;
   // Outlives the listener, and with it every connection.
   ConnectionHost connections_;
+  OverflowFile overflow_;
   const bool recorderEnabled_;  // false: it never starts, and no stand-in is handed out
   // Outlives the stand-ins below, which record into it.
   recorder::Recorder recorder_;

@@ -55,7 +55,7 @@ EventWriter::EventWriter(const RecorderOptions& options, platform::Log& log, con
       clock_(clock),
       log_(log),
       file_(options.file, limitsOf(options), clock, options.boot.empty() ? RecorderTime::currentBoot() : options.boot),
-      usage_(options.file, options.folders, capOf(options)),
+      usage_(options.file, options.folders, capOf(options), options.others),
       pace_(options.commitWindow, options.fewestWaiting) {
   file_.setLogLimit(logLimit(options));
 }

@@ -2,10 +2,12 @@
 // once when the recorder is made; the configuration sets the retention, the rest are constants but for tests.
 #pragma once
 
+#include <atomic>
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <filesystem>
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -20,6 +22,8 @@ struct RecorderOptions {
   // that of the database with its log, of files set aside, and of the files in these folders; see StateUsage.
   std::int64_t maxMegabytes = 256;
   std::vector<std::filesystem::path> folders;
+  // What else counts as part of that size: bytes that others keep for a while; null: none.
+  std::shared_ptr<const std::atomic<std::int64_t>> others;
   double maxAgeDays = 30;
   // How often an idle recorder looks for events that have grown too old. Ages are days, so a minute is soon enough; a
   // busy one looks with each commit.

@@ -8,6 +8,7 @@
 #pragma once
 
 #include <atomic>
+#include <cstdint>
 #include <deque>
 #include <memory>
 #include <string>
@@ -30,6 +31,8 @@ class TARN_CAPABILITY TarnReportingSessionMessage {
  public:
   // Names of worker classes; the texts are static.
   using DestinationWorkers = std::vector<std::string_view>;
+  // Category and type in one number.
+  using Kind = std::uint64_t;
 
   // Shares the payload with the caller until one of the two writes to it.
   TarnReportingSessionMessage(plist::Dictionary message, AudioEventCategory category, AudioEventType type)
@@ -44,6 +47,10 @@ class TARN_CAPABILITY TarnReportingSessionMessage {
   // With the type: what kind of message it is, for good.
   AudioEventCategory category() const noexcept { return category_; }
   AudioEventType type() const noexcept { return type_; }
+  Kind kind() const noexcept { return kindOf(category_, type_); }
+  static Kind kindOf(AudioEventCategory category, AudioEventType type) noexcept {
+    return Kind{static_cast<std::uint32_t>(category)} << 16U | static_cast<std::uint16_t>(type);
+  }
 
   // Whether the message repeats an earlier one of its session.
   bool isRedundant() const noexcept { return isRedundant_; }

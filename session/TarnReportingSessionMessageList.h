@@ -63,7 +63,7 @@ class TarnReportingSessionMessageList {
   void clear();
 
   // Records of pages that can't be read back count until a sort or clear().
-  std::size_t size() const noexcept { return overflowed_ + recent_.size(); }
+  std::size_t size() const noexcept { return overflowed_ + (recent_ ? recent_->size() : 0); }
   bool empty() const noexcept { return size() == 0; }
   // The record; null for one that can't be read back. Below overflowed() it may read a page: in order that costs a read
   // a page, at random one a record.
@@ -87,17 +87,20 @@ class TarnReportingSessionMessageList {
       noteChange(index);
     }
   }
+  // Calls take(index, record) from the last record to the first until it returns false. Pages of which wants(kind) is
+  // true for none of the kinds are passed over.
+  template <class Wants, class Take>
+  void goBack(const Wants& wants, Take take) const;
   // How often records of pages were changed in place. Who keeps a record that was read back looks here whether it may
   // be stale.
   std::uint64_t changes() const noexcept { return changes_; }
 
   // The first so many records lie in pages.
   std::size_t overflowed() const noexcept { return overflowed_; }
-  // The pages as they are now, without those that couldn't be read back. Pages with pending changes are written first.
-  // Pages never change, so they may be read on any thread.
+  // The pages as they are now, without those that couldn't be read back; changed ones are written first. Threads: any.
   std::vector<std::shared_ptr<const Page>> pages() const;
   // The records behind them.
-  const TarnReportingSessionMessages& recent() const noexcept { return recent_; }
+  const TarnReportingSessionMessages& recent() const;
 
  private:
   friend class TarnReportingSessionLogMemory;
@@ -120,6 +123,7 @@ class TarnReportingSessionMessageList {
     std::size_t records = 0;
     std::size_t bytes = 0;
   };
+  struct Run;
   static constexpr std::size_t kNone = static_cast<std::size_t>(-1);
 
   // The record; the reference holds until the second other page is read. Null for one that can't be read back.
@@ -135,18 +139,18 @@ class TarnReportingSessionMessageList {
 
   // Moves the oldest records in memory to the store; false when that is not possible now.
   bool moveOldest();
-  // Moves as much as the store takes.
-  void moveAll();
+  // Moves as much as the store takes; whether all records are there then.
+  bool moveAll();
+  // Puts a page behind the others. Nothing is in memory then.
+  void addPart(std::shared_ptr<const Page> page);
   // The line of the first overflow.
   void tellOverflow();
-  // Gives the page back before its list goes, for a sort that has taken its records.
-  void dropPart(std::size_t part);
-  // By the pages' first and last times and the records in memory; reads nothing.
+  // By the pages' times and the records in memory; reads nothing.
   bool isSorted() const;
-  // Empties the list into sorted ones, which merge() puts together again.
-  std::vector<TarnReportingSessionMessageList> sortedRuns();
-  // As far as the store took the runs, two pages of each are in memory at a time.
-  void merge(std::vector<TarnReportingSessionMessageList>& runs);
+  // Sorts what lies in pages and in memory; two pages of each run are in memory at a time.
+  void sortPages();
+  std::vector<Run> sortedRuns(std::vector<std::shared_ptr<const Page>> pages) const;
+  void merge(std::vector<Run>& runs);
   void takeFrom(TarnReportingSessionMessageList& other) noexcept;
 
   // Nothing for lists of walks and sorts.
@@ -157,7 +161,8 @@ class TarnReportingSessionMessageList {
   mutable int pins_ = 0;  // loops that go on; nothing is moved meanwhile
   bool isTold_ = false;
 
-  TarnReportingSessionMessages recent_;
+  // Made with the first: most sessions of a client that has thousands never get a message.
+  std::unique_ptr<TarnReportingSessionMessages> recent_;
   std::size_t bytes_ = 0;
   // What is moved together next; `firstChunk_` is the oldest of them that is still in memory.
   std::vector<Chunk> chunks_;  // of recent_, those that are complete
@@ -215,13 +220,27 @@ class TarnReportingSessionMessageList::Iterator {
   std::size_t index_ = 0;
 };
 
+template <class Wants, class Take>
+void TarnReportingSessionMessageList::goBack(const Wants& wants, Take take) const {
+  for (std::size_t index = size(); index > overflowed_; --index) {
+    if (!take(index - 1, (*recent_)[index - 1 - overflowed_])) return;
+  }
+  for (std::size_t part = parts_.size(); part > 0; --part) {
+    if (!parts_[part - 1].page->contents().mayHave(wants)) continue;
+    const Opened& opened = open(part - 1);
+    for (std::size_t index = opened.records.size(); index > 0; --index) {
+      if (!take(opened.first + index - 1, opened.records[index - 1])) return;
+    }
+  }
+}
+
 inline TarnReportingSessionMessageList::Iterator TarnReportingSessionMessageList::begin() const {
   return Iterator(*this);
 }
 
 inline const TarnReportingSessionMessageList::Record& TarnReportingSessionMessageList::look(std::size_t index) const {
   if (index >= overflowed_) [[likely]] {
-    return recent_[index - overflowed_];
+    return (*recent_)[index - overflowed_];
   }
   static const Record kLost;
   const Opened& opened = open(partOf(index));

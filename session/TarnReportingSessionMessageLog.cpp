@@ -2,16 +2,8 @@
 
 namespace tarn {
 
-namespace {
-
-std::uint64_t keyOf(AudioEventCategory category, AudioEventType type) {
-  return std::uint64_t{static_cast<std::uint32_t>(category)} << 16U | static_cast<std::uint16_t>(type);
-}
-
-}  // namespace
-
 void TarnReportingSessionMessageLog::append(Record record) {
-  Newest& newest = newest_[keyOf(record->category(), record->type())];
+  Newest& newest = newest_[record->kind()];
   const std::size_t index = messages_.size();
   const TarnReportingSessionMessage* const recent = record.get();
   messages_.append(std::move(record));
@@ -30,11 +22,20 @@ void TarnReportingSessionMessageLog::note(Newest& newest, std::size_t index,
 
 void TarnReportingSessionMessageLog::sort() {
   if (!messages_.sort()) return;
-  newest_.clear();  // of kinds of which nothing can be read back, nothing is left
-  kept_ = 0;
-  for (auto at = messages_.begin(); at != messages_.end(); ++at) {
-    note(newest_[keyOf((*at)->category(), (*at)->type())], at.index(), at->get());
+  forgetKept();
+  for (auto& [kind, newest] : newest_) {
+    newest = {};
   }
+  std::size_t left = newest_.size();
+  const auto isMissing = [&](TarnReportingSessionMessage::Kind kind) { return newest_[kind].index == kNone; };
+  messages_.goBack(isMissing, [&](std::size_t index, const Record& record) {
+    if (isMissing(record->kind())) {
+      newest_[record->kind()] = {index, record.get(), nullptr};
+      --left;
+    }
+    return left > 0;
+  });
+  std::erase_if(newest_, [](const auto& entry) { return entry.second.index == kNone; });  // of pages that are lost
 }
 
 void TarnReportingSessionMessageLog::clear() {
@@ -46,7 +47,7 @@ void TarnReportingSessionMessageLog::clear() {
 
 const TarnReportingSessionMessage* TarnReportingSessionMessageLog::newest(AudioEventCategory category,
                                                                           AudioEventType type) const {
-  const auto found = newest_.find(keyOf(category, type));
+  const auto found = newest_.find(TarnReportingSessionMessage::kindOf(category, type));
   if (found == newest_.end()) return nullptr;
   Newest& newest = found->second;
   if (newest.index >= messages_.overflowed()) return newest.recent;

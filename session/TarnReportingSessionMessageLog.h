@@ -3,7 +3,8 @@
 //
 // The rule is defined by a walk from the newest record to the oldest for one of the same category and type. The log
 // keeps the answer of that walk for every pair of category and type, so that a look-up costs the same in a long session
-// as in a short one. A sort changes what the walk would find: the answers are then computed again in one pass.
+// as in a short one. A sort changes what the walk would find: then it is walked again, over pages that have what is
+// looked for.
 //
 // A record that went to the overflow store is read back when it is looked up. Of a bounded number of kinds it is kept
 // then; a client that has thousands of kinds pays with a read for each of its messages, and not with memory.
@@ -46,9 +47,10 @@ class TarnReportingSessionMessageLog {
   std::size_t size() const noexcept { return messages_.size(); }
 
  private:
+  static constexpr std::size_t kNone = static_cast<std::size_t>(-1);
   // Where the newest record of a kind is.
   struct Newest {
-    std::size_t index = 0;
+    std::size_t index = kNone;
     const TarnReportingSessionMessage* recent = nullptr;  // while the log itself has it in memory
     Record kept;                                          // else, when it was read back
   };
@@ -61,8 +63,7 @@ class TarnReportingSessionMessageLog {
   void forgetKept() const;
 
   TarnReportingSessionMessageList messages_;
-  // By category and type in one number.
-  mutable std::unordered_map<std::uint64_t, Newest> newest_;
+  mutable std::unordered_map<TarnReportingSessionMessage::Kind, Newest> newest_;
   mutable std::size_t kept_ = 0;
   mutable std::uint64_t changesSeen_ = 0;  // of the records that are kept here
   mutable Record looked_;

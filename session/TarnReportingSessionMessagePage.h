@@ -7,6 +7,7 @@
 // memory: a page has no meaning for another process. A checksum at its end sees what a disk did to it.
 #pragma once
 
+#include <algorithm>
 #include <atomic>
 #include <cstddef>
 #include <cstdint>
@@ -32,6 +33,25 @@ class TarnReportingSessionMessagePage {
     std::atomic<std::uint64_t> recordsLost = 0;  // that couldn't be read back
   };
 
+  // What is known of the records while the page lies in the store.
+  struct Contents {
+    std::size_t records = 0;
+    // By TarnReportingSessionMessage::sortingTime.
+    double earliest = 0;
+    double latest = 0;
+    // Whether each record's time is at least that of the one before it.
+    bool isSorted = true;
+    // The kinds of the records, each once and in no order; of many kinds none is kept.
+    std::vector<TarnReportingSessionMessage::Kind> kinds;
+    bool hasManyKinds = false;
+
+    // Whether wants(kind) may be true for a record's.
+    template <class Wants>
+    bool mayHave(const Wants& wants) const {
+      return hasManyKinds || std::any_of(kinds.rbegin(), kinds.rend(), wants);
+    }
+  };
+
   // Takes records one by one, then makes a page of them. For one page. Threads: the server queue.
   class Maker {
    public:
@@ -54,14 +74,13 @@ class TarnReportingSessionMessagePage {
     std::shared_ptr<TarnReportingSessionMessagePage> makePage(const std::shared_ptr<Counts>& counts);
     // The place of these destinations in the page's table plus one; 0 for everyone.
     std::size_t numberOf(const TarnReportingSessionMessage::DestinationWorkers& destinations);
+    void noteKind(TarnReportingSessionMessage::Kind kind);
 
     std::string image_;
     plist::PackedImageWriter writer_{image_};
     std::vector<TarnReportingSessionMessage::DestinationWorkers> destinations_;
-    std::size_t size_ = 0;
-    double firstTime_ = 0;
+    Contents contents_;
     double lastTime_ = 0;
-    bool isSorted_ = true;
   };
 
   TarnReportingSessionMessagePage(const TarnReportingSessionMessagePage&) = delete;
@@ -74,14 +93,9 @@ class TarnReportingSessionMessagePage {
   // messages and the reason.
   std::vector<Record> read() const;
 
+  const Contents& contents() const noexcept { return contents_; }
   // In records.
-  std::size_t size() const noexcept { return size_; }
-  // By TarnReportingSessionMessage::sortingTime. Of the first and the last record in their order, which are the
-  // earliest and the latest when the page is sorted.
-  double firstTime() const noexcept { return firstTime_; }
-  double lastTime() const noexcept { return lastTime_; }
-  // Whether each record's time is at least that of the one before it.
-  bool isSorted() const noexcept { return isSorted_; }
+  std::size_t size() const noexcept { return contents_.records; }
 
  private:
   TarnReportingSessionMessagePage() = default;
@@ -96,10 +110,7 @@ class TarnReportingSessionMessagePage {
   // The records one after the other, then the checksum; empty when the store has it.
   std::string image_;
   std::vector<TarnReportingSessionMessage::DestinationWorkers> destinations_;
-  std::size_t size_ = 0;
-  double firstTime_ = 0;
-  double lastTime_ = 0;
-  bool isSorted_ = true;
+  Contents contents_;
 };
 
 }  // namespace tarn

@@ -31,6 +31,8 @@ class OpenConnection {
   // From now on nothing more comes in: the connection ends as if its client had closed it now. What had come is served,
   // the end is the usual one. Again does nothing more.
   virtual void endInput() = 0;
+  // Tells its user's quotas what its sessions' logs take now, which others' messages change too.
+  virtual void noteLogBytes() = 0;
 };
 
 class ConnectionHost {
@@ -73,6 +75,15 @@ class ConnectionHost {
     for (OpenConnection* connection : open_) {
       connection->endInput();
     }
+  }
+
+  // The quotas with what everybody has of them now; part of `status`.
+  plist::Dictionary quotaUse() {
+    shares.forEachParty([](ShareParty& party) { party.largestLog = 0; });
+    for (OpenConnection* connection : open_) {
+      connection->noteLogBytes();
+    }
+    return quotaStatus(limits.quotas, shares);
   }
 
   // How `settle` finds out that what was handed over so far is committed; `done` is work of the server queue then, and

@@ -45,6 +45,8 @@ struct ShareParty {
   std::size_t connections = 0;
   std::size_t sessions = 0;
   std::size_t waitingBytes = 0;
+  std::size_t logBytes = 0;
+  std::size_t largestLog = 0;  // of one connection, when it was last looked for
   MessageRate rate;
 
   // Cost of what was done for it lately, as of the fading that was the latest then.

@@ -6,6 +6,7 @@
 #include <cstddef>
 
 #include "host/loop/WorkerPool.h"
+#include "platform/OverflowStore.h"
 #include "wire/Operation.h"
 
 namespace tarn::linux_host {
@@ -33,6 +34,10 @@ struct HostLimits {
     // Bytes of requests that were taken in and can't be served yet: half-sent frames, and what is held up.
     std::size_t waitingBytesPerUser = std::size_t{32} << 20;
     std::size_t waitingBytes = std::size_t{64} << 20;  // of all users
+    // Memory that the messages of their sessions take. It is beyond what logs may take before the oldest go to disk, so
+    // a message is refused only when there is no room there either; or else the service would be ended with all of it.
+    std::size_t logBytesPerConnection = std::size_t{384} << 20;
+    std::size_t logBytesPerUser = std::size_t{512} << 20;
     // 0: not bounded.
     std::size_t messagesPerSecondPerConnection = 0;
     std::size_t messagesPerSecondPerUser = 0;
@@ -40,6 +45,8 @@ struct HostLimits {
     bool operator==(const Quotas&) const = default;
   };
   Quotas quotas;
+  // Memory that the messages of one session, and of all, take before the oldest are moved to a file.
+  platform::OverflowStore::Bounds logs{std::size_t{64} << 20, std::size_t{256} << 20};
   // How long a frame that was begun may wait for the rest; then its connection is cut off.
   std::chrono::milliseconds halfFrameTime{30000};
   // Up to so many open connections keep their input buffers while they are quiet, which spares busy ones the making of

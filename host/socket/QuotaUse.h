@@ -22,15 +22,17 @@ class QuotaUse {
   QuotaUse(const QuotaUse&) = delete;
   QuotaUse& operator=(const QuotaUse&) = delete;
 
-  // The connection has so many sessions, or waiting bytes, by now.
+  // The connection has so many sessions, waiting bytes, or bytes of logs, by now.
   void noteSessions(std::size_t sessions) noexcept;
   void noteWaitingBytes(std::size_t bytes) noexcept;
+  void noteLogBytes(std::size_t bytes) noexcept;
 
   // Why one more is beyond a quota, as the client is told ("over quota: ..."); empty when it is not. The connection's
   // own bound is asked before the user's.
   std::string refusalOfSession() const;
   // `more`: bytes of the request that would have to wait.
   std::string refusalOfWaitingBytes(std::size_t more) const;
+  std::string refusalOfLog() const;
   // A message that isn't refused counts.
   std::string refusalOfMessage(std::int64_t second);
   // Whether messages are counted at all: by default nobody asks the clock for this.
@@ -43,6 +45,7 @@ class QuotaUse {
   const HostLimits::Quotas& quotas_;
   std::size_t sessions_ = 0;  // as the party counts them
   std::size_t waitingBytes_ = 0;
+  std::size_t logBytes_ = 0;
   MessageRate rate_;
 };
 

@@ -162,6 +162,11 @@ ShareHolder::Turn SocketConnection::takeTurn(std::int64_t credit) {
 
 void SocketConnection::countSessions() {
   use_.noteSessions(object_ != nullptr ? object_->sessionCount() : 0);
+  noteLogBytes();
+}
+
+void SocketConnection::noteLogBytes() {
+  use_.noteLogBytes(object_ != nullptr ? object_->logBytes() : 0);
 }
 
 // The request that is held, and input that waits for the rest of its frame: so much of it.

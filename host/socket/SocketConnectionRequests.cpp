@@ -77,6 +77,8 @@ void SocketConnection::settle(std::uint64_t id) {
 
 std::string SocketConnection::quotaRefusal(const wire::Request& request) {
   if (request.operation == wire::Operation::SendMessage) {
+    noteLogBytes();
+    if (std::string why = use_.refusalOfLog(); !why.empty()) return why;
     if (!use_.limitsMessages()) return {};
     const auto now = host_.loop.clock().monotonic();
     return use_.refusalOfMessage(std::chrono::duration_cast<std::chrono::seconds>(now).count());

@@ -8,7 +8,7 @@
 
 #include "session/TarnReportingSessionMessagePage.h"
 #include "testing/FakePlatform.h"
-#include "tests/session/WatchedStore.h"
+#include "tests/session/log/WatchedStore.h"
 
 namespace tarn {
 namespace {

@@ -9,7 +9,7 @@
 #include <string>
 #include <vector>
 
-#include "tests/session/MessageListFixture.h"
+#include "tests/session/log/MessageListFixture.h"
 #include "tests/support/Seeds.h"
 
 namespace tarn {

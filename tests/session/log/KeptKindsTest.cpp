@@ -6,7 +6,7 @@
 #include <utility>
 
 #include "session/TarnReportingSessionMessageLog.h"
-#include "tests/session/MessageListFixture.h"
+#include "tests/session/log/MessageListFixture.h"
 
 namespace tarn {
 namespace {

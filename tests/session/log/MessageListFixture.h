@@ -13,7 +13,7 @@
 #include "service/vocabulary/TarnReportingPlatform.h"
 #include "session/TarnReportingSessionMessageList.h"
 #include "testing/FakePlatform.h"
-#include "tests/session/WatchedStore.h"
+#include "tests/session/log/WatchedStore.h"
 
 namespace tarn::testing {
 

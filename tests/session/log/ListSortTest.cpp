@@ -6,7 +6,7 @@
 #include <string>
 #include <vector>
 
-#include "tests/session/MessageListFixture.h"
+#include "tests/session/log/MessageListFixture.h"
 
 namespace tarn {
 namespace {
