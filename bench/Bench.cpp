@@ -28,6 +28,7 @@ constexpr Figure kFigures[] = {
     {"fleet", &measureFleet},
     {"visible", &measureVisible},
     {"post", &measurePost},
+    {"idle", &measureIdle},
     {"decoding", &measureDecoding},
     {"memory", &measureMemory},
     {"equality", &measureEquality},

@@ -1,5 +1,6 @@
 #include "bench/Processes.h"
 
+#include <poll.h>
 #include <signal.h>
 #include <sys/prctl.h>
 #include <sys/socket.h>
@@ -96,7 +97,8 @@ SocketPair::SocketPair() {
   theirs = ends[1];
 }
 
-std::vector<double> measureInChild(const std::function<std::vector<double>()>& measure) {
+std::vector<double> measureInChild(const std::function<std::vector<double>()>& measure,
+                                   const std::function<void()>& meanwhile) {
   const SocketPair ends;
   const ChildProcess child([&] {
     for (const double value : measure()) {
@@ -106,6 +108,10 @@ std::vector<double> measureInChild(const std::function<std::vector<double>()>& m
     }
   });
   ::close(ends.theirs);
+  pollfd results{.fd = ends.ours, .events = POLLIN, .revents = 0};
+  while (meanwhile && ::poll(&results, 1, 0) == 0) {
+    meanwhile();
+  }
   std::vector<double> values;
   double value = 0;
   while (::recv(ends.ours, &value, sizeof value, MSG_WAITALL) == sizeof value) {

@@ -55,7 +55,9 @@ struct SocketPair {
 };
 
 // Runs `measure` in a child, so that memory and caches are as fresh as a new process's; what it returned.
-std::vector<double> measureInChild(const std::function<std::vector<double>()>& measure);
+// `meanwhile` is called over and over until then, when there is one.
+std::vector<double> measureInChild(const std::function<std::vector<double>()>& measure,
+                                   const std::function<void()>& meanwhile = {});
 
 // A directory of its own inside `parent`, removed with the object.
 class TemporaryDirectory {

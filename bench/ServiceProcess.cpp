@@ -2,6 +2,7 @@
 
 #include <signal.h>
 #include <sys/prctl.h>
+#include <sys/resource.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -20,15 +21,23 @@ constexpr double kReadySeconds = 20;
 
 }  // namespace
 
-ServiceProcess::ServiceProcess(const Settings& settings, const ServiceSetup& setup) : directory_(settings.directory) {
+ServiceProcess::ServiceProcess(const Settings& settings, const ServiceSetup& setup)
+    : directory_(settings.directory), program_(settings.serviceFile), mostFileBytes_(setup.mostFileBytes) {
   writeConfiguration(setup);
-  start(settings.serviceFile);
+  start();
   waitUntilReady();
 }
 
 ServiceProcess::~ServiceProcess() {
   ::kill(id_, SIGTERM);
   ::waitpid(id_, nullptr, 0);
+}
+
+void ServiceProcess::killAndStart() {
+  ::kill(id_, SIGKILL);
+  ::waitpid(id_, nullptr, 0);
+  start();
+  waitUntilReady();
 }
 
 void ServiceProcess::writeConfiguration(const ServiceSetup& setup) const {
@@ -38,7 +47,7 @@ void ServiceProcess::writeConfiguration(const ServiceSetup& setup) const {
        << "[recorder]\nmax_megabytes = " << setup.maxMegabytes << '\n';
 }
 
-void ServiceProcess::start(const std::string& program) {
+void ServiceProcess::start() {
   const std::string state = stateDirectory();
   const std::string configuration = directory_.path() + "/config.toml";
   const std::string socket = socketPath();
@@ -49,7 +58,13 @@ void ServiceProcess::start(const std::string& program) {
   }
   if (id_ == 0) {
     ::prctl(PR_SET_PDEATHSIG, SIGTERM);
-    ::execl(program.c_str(), program.c_str(), "--socket", socket.c_str(), "--state-dir", state.c_str(), "--config",
+    if (mostFileBytes_ != 0) {
+      const auto most = static_cast<rlim_t>(mostFileBytes_);
+      const rlimit limit{.rlim_cur = most, .rlim_max = most};
+      ::signal(SIGXFSZ, SIG_IGN);
+      ::setrlimit(RLIMIT_FSIZE, &limit);
+    }
+    ::execl(program_.c_str(), program_.c_str(), "--socket", socket.c_str(), "--state-dir", state.c_str(), "--config",
             configuration.c_str(), "--log-level", "error", "--log-target", log.c_str(), nullptr);
     std::_Exit(127);
   }

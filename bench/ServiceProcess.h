@@ -24,6 +24,7 @@ struct ServiceSetup {
   bool recordsEvents = false;    // whether somebody wants every event, or nobody any
   int maxMegabytes = 65536;      // retention; the default never bites here
   bool mirrorsSessions = false;  // whether the real-time-communication reporting service takes sessions
+  long mostFileBytes = 0;        // no file of its may grow beyond that, as if the disk were full; 0: any may
 };
 
 class ServiceProcess {
@@ -34,16 +35,21 @@ class ServiceProcess {
   ServiceProcess(const ServiceProcess&) = delete;
   ServiceProcess& operator=(const ServiceProcess&) = delete;
 
+  // Kills it and starts it anew.
+  void killAndStart();
+
   pid_t id() const noexcept { return id_; }
   std::string socketPath() const { return directory_.path() + "/socket"; }
   std::string stateDirectory() const { return directory_.path() + "/state"; }
 
  private:
   void writeConfiguration(const ServiceSetup& setup) const;
-  void start(const std::string& program);
+  void start();
   void waitUntilReady() const;
 
   TemporaryDirectory directory_;
+  const std::string program_;
+  const long mostFileBytes_;
   pid_t id_ = -1;
 };
 

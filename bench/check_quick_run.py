@@ -60,15 +60,17 @@ ROWS = [
     ("evaluation of a trace, processor time", ("by the clock",)),
 ]
 for part in ("median", "p99.9", "worst"):
-    ROWS.append((f"post of a message, service alive, {part}", ("bare copy",)))
-    ROWS.append((f"post of a message, service stopped, {part}", ("bare copy",)))
+    for state in ("alive", "stopped", "absent", "killed over and over", "without room on its disk"):
+        ROWS.append((f"post of a message, service {state}, {part}", ("bare copy",)))
     ROWS.append((f"the clock around each of them, {part}", ("",)))
 for kind in ("ordinary", "merging pairs", "ending segments", "ordinary, summary file"):
     ROWS.append((f"stop of 10^3 messages, {kind}, a message", ("in all",)))
     ROWS.append((f"stop of 10^4 messages, {kind}, a message", ("in all",)))
     ROWS.append((f"stop of 10^4 messages, {kind}, extra memory", ("the log",)))
-FIGURE = re.compile(r"^-?\d+(\.\d+)? (ms|us|ns|MB|B|k/s|threads)$")
-PEER = re.compile(r"^(?P<name>.+?) \d+(\.\d+)? (ms|us|ns|MB|B|k/s)( \(.*\))?$")
+ROWS.append(("wake-ups a second with 50 quiet rings, service", ("without rings",)))
+ROWS.append(("wake-ups a second with 50 quiet rings, library", ("",)))
+FIGURE = re.compile(r"^-?\d+(\.\d+)? (ms|us|ns|MB|B|k/s|/s|threads)$")
+PEER = re.compile(r"^(?P<name>.+?) \d+(\.\d+)? (ms|us|ns|MB|B|k/s|/s)( \(.*\))?$")
 
 
 def rows_of(output):

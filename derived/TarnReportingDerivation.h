@@ -5,6 +5,10 @@
 // once after the last.
 //
 // Threads: the server queue.
+//
+// A walk sees the log sorted by time and once, from its oldest message to its newest. What it may hold of a payload
+// lies in the page that is open; keep() comes when the next page begins, so a log of any length is walked in the same
+// memory.
 #pragma once
 
 #include <cstddef>
@@ -19,7 +23,8 @@
 
 namespace tarn {
 
-// What the walk makes of the messages that `isLeftOut(index)` doesn't tell to leave out, in order.
+// What the walk makes of the messages that `isLeftOut(index)` doesn't tell to leave out, in order. The walk is used up:
+// each derivation has one of its own. Payloads may not be changed meanwhile.
 template <class IsLeftOut, class Walk>
 TarnReportingSessionMessageList TarnReportingDerivedMessages(const TarnReportingSessionMessageList& messages,
                                                              IsLeftOut isLeftOut, Walk&& walk) {
@@ -33,12 +38,14 @@ TarnReportingSessionMessageList TarnReportingDerivedMessages(const TarnReporting
   }
   return walk.finish();
 }
+// All messages.
 template <class Walk>
 TarnReportingSessionMessageList TarnReportingDerivedMessages(const TarnReportingSessionMessageList& messages,
                                                              Walk&& walk) {
   return TarnReportingDerivedMessages(
       messages, [](std::size_t) { return false; }, std::forward<Walk>(walk));
 }
+// Those that weren't merged into others.
 template <class Walk>
 TarnReportingSessionMessageList TarnReportingDerivedMessages(const TarnReportingCombinedMessages& combined,
                                                              Walk&& walk) {
@@ -47,7 +54,9 @@ TarnReportingSessionMessageList TarnReportingDerivedMessages(const TarnReporting
 }
 
 // Derives messages from a session (`derive(session)`) and sends them into it, in order. Before the first, `sendingText`
-// is logged with the reporter ID. Nothing happens when the session is gone or has an empty log.
+// is logged with the reporter ID. Nothing happens when the session is gone or has an empty log. Nothing is logged when
+// nothing was derived. The messages go through the intake like any client's, so they are stamped with the present time,
+// tagged, logged at the end of the log and handed to whoever still runs.
 template <class Derive>
 void TarnReportingSendDerivedMessages(const std::shared_ptr<TarnReportingSession>& session,
                                       const TarnReportingLogger& log, const LogText& sendingText,

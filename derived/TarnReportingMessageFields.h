@@ -22,14 +22,18 @@
 
 namespace tarn {
 
+// A look at a handful of values: it is copied cheaply and owns nothing, apart from what keepIn() was given to hold.
 template <class Field>
 class TarnReportingMessageFields {
  public:
   static constexpr std::size_t kCount = static_cast<std::size_t>(Field::Count);
+  // The key of each field in payloads, in the order of Field.
   using Keys = std::array<plist::Key, kCount>;
 
+  // Every field absent.
   TarnReportingMessageFields() = default;
-  // `source`: a payload, or whatever else has values under keys.
+  // `source`: a payload, or whatever else has values under keys. A look-up a key: for what is read once. The reader
+  // below is for what is read message by message.
   template <class Source>
   TarnReportingMessageFields(const Keys& keys, const Source& source) noexcept {
     std::transform(keys.begin(), keys.end(), values_.begin(), [&](const plist::Key& key) { return source.get(key); });
@@ -39,7 +43,7 @@ class TarnReportingMessageFields {
   const plist::ValueView& operator[](Field field) const noexcept { return values_[static_cast<std::size_t>(field)]; }
   plist::ValueView& operator[](Field field) noexcept { return values_[static_cast<std::size_t>(field)]; }
 
-  // Takes over every value that the later payload holds.
+  // Takes over every value that the later payload holds. Fields that it doesn't hold stay.
   void merge(const TarnReportingMessageFields& later) noexcept {
     std::transform(
         later.values_.begin(), later.values_.end(), values_.begin(), values_.begin(),
@@ -48,6 +52,7 @@ class TarnReportingMessageFields {
 
   // Copies the values and looks at the copies from now on; what they lay in may go.
   using Kept = std::array<plist::Value, kCount>;
+  // `kept` outlives the fields, and may hold what they look at already.
   void keepIn(Kept& kept) {
     for (std::size_t field = 0; field < kCount; ++field) {
       plist::Value copy(values_[field]);  // the old value may lie in its own place
@@ -65,7 +70,8 @@ class TarnReportingMessageFields {
 // Messages come in a few shapes over and over. Where the fields lie in a key list is remembered, for a bounded number
 // of lists, so that a payload is passed over once and only as far as its last field, and no key is looked for.
 //
-// `keys` outlives the reader. Threads: the server queue.
+// `keys` outlives the reader. Threads: the server queue. One a walk: what it remembers is worth nothing beyond the log
+// that it goes through.
 template <class Field>
 class TarnReportingMessageFieldReader {
  public:
@@ -73,6 +79,7 @@ class TarnReportingMessageFieldReader {
 
   explicit TarnReportingMessageFieldReader(const typename Fields::Keys& keys) : keys_(keys) {}
 
+  // The fields look into the payload.
   Fields read(const plist::Dictionary& payload) {
     Fields fields;
     auto entry = payload.begin();
@@ -93,8 +100,11 @@ class TarnReportingMessageFieldReader {
     Places places;
   };
 
+  // More shapes than a session's messages usually have. Two that share a slot push each other out and cost a pass over
+  // their keys each time, and nothing else.
   static constexpr std::size_t kSlots = 128;
 
+  // Compares the whole key list, as two lists may have the same hash.
   const Places& placesIn(const plist::Dictionary& payload) {
     Shape& slot = slots_[payload.keysHash() % kSlots];
     if (!payload.hasKeys(slot.keys)) {

@@ -18,6 +18,10 @@
 //   MessagePointer makeMessage(const TarnReportingSegment<Field>&);
 //
 // Threads: the server queue.
+//
+// Output runs from a message that says so to one that says that it no longer does, or that has a duration, with which a
+// client closes its session. A message that doesn't mention it changes nothing about it. What is told of a segment are
+// the values from before the message that ended it. Times are epoch seconds of the messages, not of their arrival.
 #pragma once
 
 #include <cstddef>
@@ -33,7 +37,7 @@
 
 namespace tarn {
 
-// A segment that has ended.
+// A segment that has ended. Handed to makeMessage(); what it looks at holds for that call.
 template <class Field>
 struct TarnReportingSegment {
   const TarnReportingMessageFields<Field>& state;  // while it lasted
@@ -42,6 +46,8 @@ struct TarnReportingSegment {
   std::size_t index;  // among the messages that come out, from 1
 };
 
+// Used once. One look at each message's fields and, while it runs, one comparison of those that cut; what lasts from
+// message to message is the state of those fields alone.
 template <class Rules>
 class TarnReportingSegmentWalk {
  public:
@@ -49,11 +55,14 @@ class TarnReportingSegmentWalk {
   using Fields = TarnReportingMessageFields<Field>;
 
   // `process`: the application's name; nothing comes out when it is empty. Segments of `minimumSeconds` or less are
-  // left out. Both `process` and the previous values outlive the walk.
+  // left out. Both `process` and the previous values outlive the walk. The minimum is compared strictly: a segment of
+  // exactly so many seconds is left out.
   TarnReportingSegmentWalk(const TarnReportingSessionPreviousValues& previousValues, std::string_view process,
                            double minimumSeconds)
       : process_(process), minimumSeconds_(minimumSeconds), state_(Rules::initialState(previousValues)) {}
 
+  // The next message in order of time. Its changes count only while it runs and has run before: what a message that
+  // starts it says is the first segment's state.
   void take(const plist::Dictionary& payload) {
     const Fields message = reader_.read(payload);
     const plist::ValueView& time = message[Field::Timestamp];
@@ -87,6 +96,8 @@ class TarnReportingSegmentWalk {
     clock_.keep();
   }
 
+  // The messages in the order of their segments, each with its index and how many there are. What still runs at the end
+  // of the log makes none.
   TarnReportingSessionMessageList finish() {
     TarnReportingNumberMessages(derived_);
     // A list is made, which may fail, and then moved into: making one of another can't tell that there was no memory.
@@ -96,7 +107,9 @@ class TarnReportingSegmentWalk {
   }
 
  private:
-  // Ends the segment at `time`, where the next one begins. The state is still that of the segment.
+  // Ends the segment at `time`, where the next one begins. The state is still that of the segment. Without a time stamp
+  // here or at its beginning a segment is left out. The lines are at debug level: the length, then whether a message
+  // was added.
   void endSegment(const plist::ValueView& time) {
     const double seconds = clock_.secondsUntil(time);
     Rules::kLog(LogLevel::Debug, Rules::kLength, Rules::kOperation, seconds, time, time.asDouble(), clock_.start(),
@@ -112,8 +125,10 @@ class TarnReportingSegmentWalk {
 
   const std::string_view process_;
   const double minimumSeconds_;
+  // A walk's own, as rules may gather things from message to message.
   Rules rules_;
   TarnReportingMessageFieldReader<Field> reader_{Rules::keys()};
+  // The values before the message that is looked at; `kept_` holds them where the payloads that they lay in have gone.
   Fields state_;
   typename Fields::Kept kept_;
   bool running_ = false;

@@ -16,7 +16,7 @@
 namespace tarn {
 
 // The beginning of the segment that runs, if one does. The time stamp is kept as the message has it, for the log; it
-// lies in that message's payload until keep().
+// lies in that message's payload until keep(). One a walk.
 class TarnReportingSegmentClock {
  public:
   // An absent time stamp leaves no beginning.
@@ -39,20 +39,27 @@ class TarnReportingSegmentClock {
   plist::Value kept_;
 };
 
-// Comparisons of values that should be numbers or texts; values of other kinds are read as such.
+// Comparisons of values that should be numbers or texts; values of other kinds are read as such. Two numbers are
+// compared by value across their kinds, and so exactly; anything else as doubles, where a text that is no number is 0.
 bool TarnReportingNumbersDiffer(const plist::ValueView& first, const plist::ValueView& second);
+// By their text forms, where one isn't a text.
 bool TarnReportingTextsDiffer(const plist::ValueView& first, const plist::ValueView& second);
 
-// The bounds of the bucket labels: seconds up to five hours, and volumes in steps of a sixteenth.
+// The bounds of the bucket labels: seconds up to five hours, and volumes in steps of a sixteenth. Readers of the events
+// count by these labels, so a bound that moves breaks comparisons with earlier data. Longer and louder than the last
+// gives the last.
 std::span<const double> TarnReportingUtilityBucketNumberToStringTimes() noexcept;
 std::span<const double> TarnReportingUtilityBucketNumberToStringVolumes() noexcept;
-// The labels themselves.
+// The labels themselves. Whole seconds, as "1800", and up to four decimals, as "0.0625" or "0.5"; of two bounds equally
+// near the larger.
 std::string TarnReportingSegmentLengthLabel(double seconds);
 std::string TarnReportingVolumeLabel(double volume);
 
-// The index of a message among the derived ones, from 1, and how many there are.
+// The index of a message among the derived ones, from 1, and how many there are. "msgidx"; with the count readers see
+// whether they have all of a session's.
 extern const plist::Key kTarnReportingMessageIndex;
-// Tells each of the derived messages how many they are.
+// Tells each of the derived messages how many they are. Sets "msgcnt", in place, since the count is known only at the
+// end.
 void TarnReportingNumberMessages(const TarnReportingSessionMessageList& derived);
 
 }  // namespace tarn

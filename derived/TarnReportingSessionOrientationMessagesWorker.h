@@ -9,6 +9,7 @@
 
 namespace tarn {
 
+// Kept as a name that a table may list: a class that declines every session costs one call a start.
 class TarnReportingSessionOrientationMessagesWorker : public TarnReportingSessionWorkerProtocol,
                                                       public TarnReportingSessionWorkerProducerProtocol {
  public:

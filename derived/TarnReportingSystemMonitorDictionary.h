@@ -30,6 +30,7 @@ class TARN_CAPABILITY TarnReportingSystemMonitorDictionary {
   TarnReportingSystemMonitorDictionary(const TarnReportingSystemMonitorDictionary&) = delete;
   TarnReportingSystemMonitorDictionary& operator=(const TarnReportingSystemMonitorDictionary&) = delete;
 
+  // For a MutexLock around steps that belong together. Nobody waits or sends messages under it.
   void lock() const TARN_ACQUIRE();
   void unlock() const TARN_RELEASE();
 
@@ -40,16 +41,19 @@ class TARN_CAPABILITY TarnReportingSystemMonitorDictionary {
   plist::Dictionary states() const;
 
   // Calls `observer` whenever a new state of the feature was stored; the state is then what state() gives. The observer
-  // holds whoever it serves weakly, and goes with removeObserver.
+  // holds whoever it serves weakly, and goes with removeObserver. It isn't called for the state that is there already.
+  // Tokens are never used again.
   [[nodiscard]] ObserverToken addObserver(const plist::Key& feature, Observer observer);
-  // An unknown token is ignored.
+  // An unknown token is ignored. What the observer holds is released without the lock.
   void removeObserver(ObserverToken token);
 
-  // For the monitor: stores a state without telling anybody, and tells the observers once the lock is released.
+  // For the monitor: stores a state without telling anybody, and tells the observers once the lock is released. While
+  // they are told, one that another adds isn't called yet, and one that is removed isn't called any more.
   void store(const plist::Key& feature, const plist::Dictionary& state);
   void notifyObservers(const plist::Key& feature);
 
  private:
+  // Shared with a round of notifications that goes on, which looks at `removed` before each call.
   struct Observation {
     ObserverToken token;
     plist::Key feature;

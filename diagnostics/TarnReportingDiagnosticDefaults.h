@@ -11,13 +11,15 @@
 
 namespace tarn {
 
+// Stateless: one may be made wherever it is needed.
 class TarnReportingDiagnosticDefaults {
  public:
+  // Another suite than that of the service's own settings.
   static constexpr std::string_view kSuite = "sys.oxbow.tarnkit.tarnreporting";
 
   // Absent when there is none.
   plist::Value value(std::string_view key) const { return TarnReportingFacilities().defaults.value(kSuite, key); }
-  // Whether it is now stored.
+  // Whether it is now stored. A value that can't be stored is logged by the platform.
   [[nodiscard]] bool setValue(std::string_view key, const plist::ValueView& value) const {
     return TarnReportingFacilities().defaults.setValue(kSuite, key, value);
   }

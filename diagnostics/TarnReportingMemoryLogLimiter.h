@@ -11,15 +11,18 @@
 
 namespace tarn {
 
+// Belongs to the process (ProcessState), since the tools look at the whole device.
 class TarnReportingMemoryLogLimiter {
  public:
+  // A request exactly so long after the last one is refused still.
   static constexpr std::chrono::nanoseconds kInterval = std::chrono::seconds(5);
 
   TarnReportingMemoryLogLimiter() = default;
   TarnReportingMemoryLogLimiter(const TarnReportingMemoryLogLimiter&) = delete;
   TarnReportingMemoryLogLimiter& operator=(const TarnReportingMemoryLogLimiter&) = delete;
 
-  // Whether a log may be made now, on the monotonic clock; a yes restarts the interval. The first is always a yes.
+  // Whether a log may be made now, on the monotonic clock; a yes restarts the interval. The first is always a yes. A no
+  // restarts nothing.
   bool claim(std::chrono::nanoseconds now) {
     const MutexLock lock(mutex_);
     if (lastRun_ && now - *lastRun_ <= kInterval) return false;

@@ -22,15 +22,20 @@
 
 namespace tarn {
 
+// It runs from the session's creation on, but not in single-message sessions. Its lines have no module before them,
+// since programs look for "wiredlog:" and "WIRED LOG BLOCK" at their beginning.
 class TarnReportingSessionMemoryLogWorker : public TarnReportingSessionWorkerProtocol,
                                             public TarnReportingSessionWorkerConsumerProtocol {
  public:
   static constexpr std::string_view kClassName = "TarnReportingSessionMemoryLogWorker";
+  // A tool that takes longer counts as hanging.
   static constexpr std::chrono::seconds kToolTimeLimit{60};
   static constexpr std::chrono::seconds kPatience{75};  // well below the longest wait that a watchdog bears
+  // A tool that prints without end is cut here, whether or not its lines are wanted.
   static constexpr std::size_t kMostBytesRead = std::size_t{16} << 20U;
   static constexpr std::size_t kMostBytesKept = std::size_t{1} << 20U;  // some two thousand log entries
 
+  // Whether the device has the tools is seen only when they are started.
   static std::unique_ptr<TarnReportingSessionMemoryLogWorker> initWithSession(
       const std::shared_ptr<TarnReportingSession>& session);
   static bool startOnInit() { return true; }
@@ -38,6 +43,9 @@ class TarnReportingSessionMemoryLogWorker : public TarnReportingSessionWorkerPro
 
   // A request repeats the one before word by word.
   bool handleRedundantMessages() { return true; }
+  // Returns when both tools are through or given up; the zones' blocks are logged first, then those of the resources,
+  // each tool's numbered from 1. Of the resources only the lines about memory and time are kept, without the tasks that
+  // wire nothing. A tool that can't be executed has an error line and no block.
   void handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) override;
 };
 

@@ -356,9 +356,12 @@ class Run {
     for (std::size_t at = 0; at < clients.size(); ++at) {
       const auto& expected = model_.clients()[at]->sessions;
       std::size_t place = 0;
-      clients[at]->clientReportingSessionMap().forEach([&](std::int64_t reporterID, const auto& session) {
+      const TarnReportingSessionMap& sessions = clients[at]->clientReportingSessionMap();
+      TarnReportingSessionMap::Place from = 0;
+      sessions.forEachFrom(from, [&](std::int64_t reporterID) {
         check(place < expected.size() && reporterID == expected[place]->reporterID, "sessions");
-        compare(*session, *expected[place++]);
+        compare(*sessions.find(reporterID), *expected[place++]);
+        return true;
       });
       check(place == expected.size(), "sessions");
     }

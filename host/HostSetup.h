@@ -2,6 +2,9 @@
 // and to its state directory, its log.
 //
 // Owned by the entry point; the platform stands on it. Threads: one, before all others.
+//
+// Order: settings, state directory, signals, the right to the socket, the lock on the state directory, the log. What
+// another service works on is only touched once it is known that there is none.
 #pragma once
 
 #include <memory>
@@ -26,23 +29,31 @@ class HostSetup {
   HostSetup& operator=(const HostSetup&) = delete;
 
   // Called once. An error tells what is in the way, in one line for whoever started the service, and its code is the
-  // exit status; then nothing else may be used.
+  // exit status (78 for settings, else 1); then nothing else may be used. Also takes write permission for the group and
+  // all for others out of the process's mask. May wait some seconds for a service that is just ending.
   [[nodiscard]] Status prepare(const ServiceOptions& options);
-  // Gives what was logged a last while to be written; the process may end then.
+  // Gives what was logged a last while of half a second to be written, the counts of floods included; the process may
+  // end then. Any thread.
   void settleLog();
 
+  // What was read: the file's settings, or the defaults without one.
   HostConfiguration configuration;
   JsonDeviceProperties deviceProperties;
+  // Blocked from here on; served once SignalSource::start() was called.
   std::shared_ptr<SignalSource> signals;
+  // Handed over, or claimed and not bound yet; the platform takes it.
   ListenSocket socket;
   LinuxClock clock;
   // The guard against floods, in front of the queue.
   std::unique_ptr<LogFloodGuard> log;
 
  private:
+  // A configuration that is named must be there; the installed one may be absent.
   Status readSettings(const ServiceOptions& options);
 
+  // Held for the life of the process.
   FileLock stateLock_;
+  // The log itself, to which the guard hands on.
   std::unique_ptr<QueuedLog> queuedLog_;
 };
 

@@ -39,11 +39,13 @@ HostLimits withinTheSystem(HostLimits limits) {
 }
 
 // Under the recorder's cap stands all that the service writes without end.
-recorder::RecorderOptions recorderOptions(const HostConfiguration& configuration, const std::string& stateDirectory) {
+recorder::RecorderOptions recorderOptions(const HostConfiguration& configuration, const std::string& stateDirectory,
+                                          const OverflowFile& overflow) {
   recorder::RecorderOptions options = configuration.recorder;
   options.file = stateDirectory + "/recorder.sqlite3";
   const std::string logs = configuration.paths.diagnosticLogs.value_or(stateDirectory) + "/DiagnosticLogs/Audio/";
   options.folders = {logs + "Reporting", logs + "Traces"};
+  options.others = overflow.size();
   return options;
 }
 
@@ -54,6 +56,12 @@ plist::Dictionary lossStatus() {
           {"connections_closed", counts.of(Loss::Connection)},
           {"work_given_up", counts.of(Loss::Work)},
           {"reserve_blocks_used", counts.blocksUsed}};
+}
+
+// What messages that wait on disk may take of it.
+std::size_t overflowShare(const recorder::RecorderOptions& options) {
+  constexpr std::size_t kShare = 4;
+  return (static_cast<std::size_t>(options.maxMegabytes) << 20U) / kShare;
 }
 
 // The source that only some devices have beside the files'.
@@ -79,8 +87,9 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
       settleLog_(std::move(ground.settleLog)),
       loop_(clock_),
       connections_(loop_, log_, withinTheSystem(configuration.limits)),
+      overflow_(stateDirectory, configuration.limits.logs, overflowShare(configuration.recorder)),
       recorderEnabled_(configuration.recorderEnabled),
-      recorder_(recorderOptions(configuration, stateDirectory), log_, clock_),
+      recorder_(recorderOptions(configuration, stateDirectory, overflow_), log_, clock_),
       workQueues_(clock_, loop_.queue(), configuration.limits.poolWork),
       tally_(recorder_, clock_, configuration.tally.inUse),
       wattlog_(recorder_, clock_),
@@ -157,7 +166,8 @@ platform::Facilities LinuxPlatform::facilitiesOf() {
                               .performanceTrace = &performanceTrace_,
                               .traceAnalysis = &traceAnalysis_,
                               .perfDataWriters = &perfDataWriters_,
-                              .signposts = &signposts_};
+                              .signposts = &signposts_,
+                              .overflow = &overflow_};
 }
 
 Status LinuxPlatform::start() {
@@ -272,7 +282,7 @@ plist::Dictionary LinuxPlatform::status() {
       connections_.ledger.status(serviceCounts_(), loop_.queue()->waiting() + workQueues_.unfinished(),
                                  {counters.handedOver, counters.committed, counters.waiting, counters.expired,
                                   counters.failed, counters.lostBefore});
-  status.set("quotas", quotaStatus(connections_.limits.quotas, connections_.shares));
+  status.set("quotas", connections_.quotaUse());
   status.set("out_of_memory", lossStatus());
   return status;
 }

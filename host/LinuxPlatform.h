@@ -7,6 +7,9 @@
 // as if its connection had closed, then the loop stops. exitProcess() stops no session.
 //
 // Owned by the entry point. Threads: the main loop's, which is the one that calls serve().
+//
+// Members stand in the order in which they need each other: those above are there when those below are made. Nothing of
+// it is torn down in the service, which ends by _Exit() while other threads still use the parts.
 #pragma once
 
 #include <memory>
@@ -30,6 +33,7 @@
 #include "host/machine/LinuxProcessEnvironment.h"
 #include "host/machine/LinuxProcessFacts.h"
 #include "host/machine/LinuxRandomSource.h"
+#include "host/machine/OverflowFile.h"
 #include "host/settings/FileNotificationCenter.h"
 #include "host/settings/HostConfiguration.h"
 #include "host/settings/JsonDefaultsStore.h"
@@ -62,7 +66,7 @@ namespace tarn::linux_host {
 
 class LinuxPlatform final : private platform::ProcessControl {
  public:
-  // What the service counts; asked on the loop's thread.
+  // What the service counts; asked on the loop's thread, for each `status`.
   using ServiceCount = platform::UniqueFunction<ServiceCounts()>;
   // What was there before; all of it outlives the platform.
   struct Ground {
@@ -72,20 +76,27 @@ class LinuxPlatform final : private platform::ProcessControl {
     platform::UniqueFunction<void()> settleLog = {};  // the last thing before the process ends
   };
 
-  // The state directory is one that prepareStateDirectory() made.
+  // Makes the parts and puts them together: no thread, no file and no client yet. The limit of open descriptors is
+  // raised, and connections held below it. The state directory is one that prepareStateDirectory() made.
   LinuxPlatform(const HostConfiguration& configuration, const std::string& stateDirectory,
                 JsonDeviceProperties deviceProperties, Ground ground);
   LinuxPlatform(const LinuxPlatform&) = delete;
   LinuxPlatform& operator=(const LinuxPlatform&) = delete;
   ~LinuxPlatform() override = default;
 
-  // What the process installs.
+  // What the process installs. With the recorder switched off there is no back-end but one that wants no analytics
+  // events.
   const platform::Facilities& facilities() const noexcept { return facilities_; }
+  // For the signals; it runs in serve().
   MainLoop& loop() noexcept { return loop_; }
 
-  // Starts what has threads, and waits until the recorder's file is open.
+  // Starts what has threads, and waits until the recorder's file is open: a large one is read through first, as nothing
+  // could be committed in time before. Fails when the system gives the loop no descriptors, or for the folder of
+  // temporary files. A file that can't be opened is no failure: the recorder tries on. Called once, first.
   [[nodiscard]] Status start();
-  // Lets clients connect, once whoever they are handed to is whole.
+  // Lets clients connect, once whoever they are handed to is whole; then tells the service manager that it is ready and
+  // begins to feed its watchdog. After a failure the recorder is shut down and the process can only end. The delegate
+  // isn't held.
   [[nodiscard]] Status listen(ListenSocket socket, const std::shared_ptr<platform::ListenerDelegate>& delegate,
                               ServiceCount serviceCounts);
   // Takes nobody and nothing more in, serves what each client had sent and then its end, calls `clientsAreGone` and
@@ -94,18 +105,28 @@ class LinuxPlatform final : private platform::ProcessControl {
   // or an event of it.
   void endClients(platform::UniqueFunction<void()> clientsAreGone);
   // Serves until the loop is stopped, then serves the requests that were taken and makes safe what the recorder holds.
+  // Blocks for the life of the service.
   void serve();
 
  private:
+  // For a client's killService: replies to what came before go out, what was handed over is made safe, and the process
+  // is gone with this status. No session is stopped.
   void exitProcess(int status) override;
   platform::Facilities facilitiesOf();
+  // The ledger with the recorder's and the service's counts, what waits on all queues, and the quotas.
   plist::Dictionary status();
+  // Once a turn, while the clients end: whether the last is gone and nothing waits any more.
   void lookForTheEnd();
+  // Once a turn: what was given up for want of memory, in one line a second at the most.
   void tellLosses();
   void giveUpClients();
+  // The end in its order: no client, no ping, the workers' queues as far as they get shorter, no trace, the recorder's
+  // last commit, the log.
   void end();
+  // Lets the workers' queues finish, as long as they get shorter; what is left is told.
   void settleQueues();
 
+  // Constant from the making on.
   const std::chrono::milliseconds settleTime_;
   const std::chrono::milliseconds endTime_;
   const std::string temporaryDirectory_;
@@ -113,11 +134,17 @@ class LinuxPlatform final : private platform::ProcessControl {
   platform::Log& log_;
   ServiceManager& serviceManager_;
   platform::UniqueFunction<void()> settleLog_;
+  // What stands between clients and the service.
   MainLoop loop_;
+  // Outlives the listener, and with it every connection.
   ConnectionHost connections_;
+  OverflowFile overflow_;
   const bool recorderEnabled_;  // false: it never starts, and no stand-in is handed out
+  // Outlives the stand-ins below, which record into it.
   recorder::Recorder recorder_;
+  // The queues, and the stand-ins for the back-ends that answer on them.
   LinuxWorkQueues workQueues_;
+  // The stand-ins for the back-ends, each recording under its own name.
   LinuxRandomSource randomSource_;
   recorder::RecorderTallyService tally_;
   NoTallyService noTally_;
@@ -127,14 +154,18 @@ class LinuxPlatform final : private platform::ProcessControl {
   recorder::RecorderRtcReportingService rtc_;
   recorder::RecorderTattleService tattle_;
   recorder::RecorderGyreService gyre_;
+  // The facilities that are the machine's own.
   LinuxConditions conditions_;
   JsonDefaultsStore defaults_;
   const std::shared_ptr<FileNotificationCenter> notifications_;
+  // What reports ask of the machine.
   LinuxProcessFacts processFacts_;
   LinuxFileSystem fileSystem_;
+  // The driver report channels: the sources, then the service that offers them.
   FlumeFiles flumeFiles_;
   std::optional<AlsaFlume> alsaFlume_;  // of a device that is told where its sound hardware is
   LinuxFlumeService flume_;
+  // Performance traces, from the signposts to their analysis.
   LinuxSignposts signposts_;
   LinuxTracePoints tracePoints_;
   LinuxPerformanceTraceService performanceTrace_;
@@ -144,7 +175,9 @@ class LinuxPlatform final : private platform::ProcessControl {
   LinuxCommandRunner commandRunner_;
   LinuxPerfDataWriters perfDataWriters_;
   JsonDeviceProperties deviceProperties_;
+  // The service's life.
   Watchdog watchdog_;
+  // From listen() on.
   ServiceCount serviceCounts_;
   std::shared_ptr<SocketListener> listener_;
   platform::UniqueFunction<void()> clientsAreGone_;  // set while the clients' ends are served

@@ -1,4 +1,6 @@
-// NoTallyService: the analytics-event service of a machine that has none: nobody wants an event.
+// NoTallyService: the analytics-event service of a machine that has none: nobody wants an event. It stands there
+// because every platform has this facility, where others may be lacking: workers ask it before they form an event, and
+// so form none.
 //
 // Owned by the platform. Threads: any.
 #pragma once
@@ -10,6 +12,7 @@ namespace tarn::linux_host {
 class NoTallyService final : public platform::TallyService {
  public:
   bool eventIsInUse(std::string_view) override { return false; }
+  // The payload is never asked for.
   void sendEventLazy(std::string_view, PayloadCallback) override {}
 };
 

@@ -11,19 +11,23 @@
 
 namespace tarn::platform {
 
+// Shared by the one who waits and by those who signal, which may come when the waiter is gone. Nothing in it fails.
 class TARN_CAPABILITY Condition {
  public:
   virtual ~Condition() = default;
   // The lock that what is waited for is read and changed under; not to be taken twice.
   virtual void lock() TARN_ACQUIRE() = 0;
+  // Waking isn't bound to the lock: signal() may be called with it or without.
   virtual void unlock() TARN_RELEASE() = 0;
   // Waits, locked before and after, until it is signalled or `timeout` has passed; false means the time is up. May wake
-  // without a signal.
+  // without a signal, so whoever waits looks again what it waits for. A timeout of 0 or less doesn't wait. On the
+  // server queue the platform goes on with its sockets meanwhile, but runs no other work of the queue.
   virtual bool waitFor(std::chrono::duration<double> timeout) = 0;
-  // Wakes one waiter.
+  // Wakes one waiter. Without one nothing happens, and nothing is remembered.
   virtual void signal() = 0;
 };
 
+// One a process.
 class Conditions {
  public:
   virtual ~Conditions() = default;

@@ -13,7 +13,8 @@
 
 namespace tarn::platform {
 
-// A file that is open for writing. Destroying it closes it and drops the result.
+// A file that is open for writing, from its beginning on. Destroying it closes it and drops the result, so whoever
+// wants to know calls close().
 class WritableFile {
  public:
   virtual ~WritableFile() = default;
@@ -25,11 +26,14 @@ class WritableFile {
   [[nodiscard]] virtual Status close() = 0;
 };
 
+// Places that the platform chooses.
 enum class WellKnownDirectory {
   DiagnosticLogs,  // the device user's diagnostic logs; its last component is "DiagnosticLogs"
   Temporary,       // this process's own files that nobody needs after it
 };
 
+// Errors have the system's number and text. Paths that name a link at their end are not followed where something is
+// written.
 class FileSystem {
  public:
   virtual ~FileSystem() = default;
@@ -38,15 +42,16 @@ class FileSystem {
   // Makes the directory and what is missing above it, each with these permissions less the process's mask. One that is
   // there already is left as it is, and that is a success.
   [[nodiscard]] virtual Status createDirectories(std::string_view path, std::uint32_t permissions) = 0;
-  // Makes an empty file; fails when there is something at the path.
+  // Makes an empty file; fails when there is something at the path or no directory for it.
   [[nodiscard]] virtual Status createFile(std::string_view path) = 0;
-  // Opens a file that exists, and empties it.
+  // Opens a file that exists, and empties it; the pointer is null just when that failed.
   virtual Result<std::unique_ptr<WritableFile>> openForWriting(std::string_view path) = 0;
-  // The whole content of a file; fails when it is larger than `mostBytes`.
+  // The whole content of a file, bytes as they are; fails when it is larger than `mostBytes`, and is empty then.
   virtual Result<std::string> readFile(std::string_view path, std::size_t mostBytes) = 0;
   // Whether there is something at the path; false also when that can't be found out.
   virtual bool exists(std::string_view path) const = 0;
-  // Moves a file, onto another file system too, replacing what is there; never leaves half a file at `to`.
+  // Moves a file, onto another file system too, replacing what is there; never leaves half a file at `to`. After an
+  // error the file is where it was, or in both places when only its removal failed.
   [[nodiscard]] virtual Status moveFile(std::string_view from, std::string_view to) = 0;
 };
 

@@ -7,7 +7,9 @@
 
 namespace tarn::platform {
 
+// What a clock on the wall shows, and how far that is from UTC.
 struct LocalTime {
+  // 1 to 9999.
   std::int64_t year = 1970;
   int month = 1;             // 1 to 12
   int day = 1;               // 1 to 31
@@ -19,11 +21,13 @@ struct LocalTime {
   int secondsEastOfUtc = 0;  // at that moment, summer time included
 };
 
+// Owned by the platform. Knows the device's zone alone, as the system tells it.
 class LocalCalendar {
  public:
   virtual ~LocalCalendar() = default;
-  // The moment as the device's clocks showed it; fractions of a second are cut off toward the past. Moments beyond the
-  // years 1 to 9999 count as the nearest of these.
+  // The moment (seconds since 1970 UTC) as the device's clocks showed it, by the rules of summer time that held then;
+  // fractions of a second are cut off toward the past. Moments beyond the years 1 to 9999 count as the nearest of
+  // these, and what is no number as 1970.
   virtual LocalTime localTime(double epochSeconds) const = 0;
   // The moment written by a pattern: yyyy, MM, dd, HH, mm, ss (digits with leading zeros) and Z (the offset from UTC as
   // +0100); every other character stands for itself. "yyyyMMdd-HHmmssZ" gives 20240131-142501+0100.

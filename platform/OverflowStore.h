@@ -16,23 +16,32 @@
 
 namespace tarn::platform {
 
+// Owned by the platform, which may lack it. Its cost is the disk's, so whoever writes gathers much at a time.
 class OverflowStore {
  public:
-  // How much memory logs may take before the store is used.
+  // How much memory logs may take before the store is used, in bytes: those of one session, and all together. The
+  // largest numbers stand for no bound.
   struct Bounds {
+    // Of one session's log; its oldest messages go first.
     std::size_t bytesOfSession = std::numeric_limits<std::size_t>::max();
+    // Of all logs; the largest one gives way.
     std::size_t bytesInAll = std::numeric_limits<std::size_t>::max();
 
     bool operator==(const Bounds&) const = default;
   };
+  // What the store calls something that it keeps. Only it knows what the number means.
   using Place = std::uint64_t;
 
   virtual ~OverflowStore() = default;
 
+  // The same all the time; asked once.
   virtual Bounds bounds() const = 0;
-  // Keeps these bytes, of which there is at least one, until they are removed. After an error nothing is kept.
+  // Keeps these bytes, of which there is at least one, until they are removed. After an error nothing is kept; a disk
+  // without room is one, and the caller goes on in memory.
   virtual Result<Place> write(std::string_view bytes) = 0;
+  // The bytes that were written, all of them; they stay where they are. An error says that they are gone or damaged.
   virtual Result<std::string> read(Place place) = 0;
+  // Gives the room back. `place` is one that write() gave and nobody removed yet.
   virtual void remove(Place place) noexcept = 0;
 };
 

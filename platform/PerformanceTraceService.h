@@ -13,11 +13,16 @@
 
 namespace tarn::platform {
 
+// What is recorded, by a number of the service's own, and whether the file is packed at the end. A service may refuse
+// either.
 struct PerformanceTraceConfiguration {
+  // Which kinds of events are recorded, and with what beside them.
   std::int32_t templateNumber = 2;
+  // A platform that never packs its files refuses it.
   bool compressWhenFinished = true;
 };
 
+// Told what becomes of a trace. Owned by whoever traces; a trace holds it weakly and calls nobody once it is gone.
 class PerformanceTraceDelegate {
  public:
   virtual ~PerformanceTraceDelegate() = default;
@@ -31,6 +36,7 @@ class PerformanceTraceDelegate {
                                            const Status& error) = 0;
 };
 
+// One trace, owned by whoever asked for it. A second start, and a stop of what isn't running, do nothing.
 class PerformanceTraceSession {
  public:
   virtual ~PerformanceTraceSession() = default;
@@ -46,6 +52,7 @@ class PerformanceTraceSession {
   virtual std::uint64_t eventsLeftOut() const = 0;
 };
 
+// Owned by the platform, which may lack it. Threads: any.
 class PerformanceTraceService {
  public:
   virtual ~PerformanceTraceService() = default;

@@ -3,6 +3,7 @@
 
 namespace tarn::platform {
 
+// Owned by the platform, which alone knows what must be safe before the process ends.
 class ProcessControl {
  public:
   virtual ~ProcessControl() = default;

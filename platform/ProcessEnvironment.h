@@ -10,10 +10,12 @@
 
 namespace tarn::platform {
 
+// Owned by the platform. Nothing is ever read here: what the environment tells us comes in as options.
 class ProcessEnvironment {
  public:
   virtual ~ProcessEnvironment() = default;
-  // Sets the variable, replacing a value that it has.
+  // Sets the variable, replacing a value that it has. Fails for a name that is empty or holds "=", and for want of
+  // memory.
   [[nodiscard]] virtual Status set(std::string_view name, std::string_view value) = 0;
 };
 

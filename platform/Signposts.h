@@ -15,6 +15,7 @@
 
 namespace tarn::platform {
 
+// Under which traces list what the service tells, and by which probes ask for it.
 inline constexpr std::string_view kSignpostSubsystem = "sys.oxbow.tarnkit";
 
 // Which kind of work a signpost tells of.
@@ -26,7 +27,7 @@ enum class SignpostCategory : std::uint8_t {
   TracePoint,  // a mark by its code
 };
 
-// A small number that goes with a signpost; none while it has no name.
+// A small number that goes with a signpost; none while it has no name. Its name is a static text.
 struct SignpostArgument {
   std::string_view name;
   std::int64_t value = 0;
@@ -35,11 +36,14 @@ struct SignpostArgument {
 // Its name in a trace is "subject.verb".
 struct Signpost {
   SignpostCategory category = SignpostCategory::Operation;
+  // Both are static texts, joined when the trace is written.
   std::string_view subject;  // whose work it is
   std::string_view verb;     // what is done
   SignpostArgument argument{};
 };
 
+// Owned by the platform; null where nothing ever records. Most signposts are set by TarnReportingSignpost, which asks
+// the switch and keeps the moment; these are what it stands on.
 class Signposts {
  public:
   Signposts() = default;
@@ -47,19 +51,22 @@ class Signposts {
   Signposts& operator=(const Signposts&) = delete;
   virtual ~Signposts() = default;
 
-  // Whether anything records; it may change at any moment.
+  // Whether anything records; it may change at any moment, so an interval may begin without a recorder and end with
+  // one. One load, without order.
   bool isRecording() const noexcept { return recording_.load(std::memory_order_relaxed); }
   // The same for those who keep the way short; it lives as long as this.
   const std::atomic<bool>& recordingSwitch() const noexcept { return recording_; }
 
-  // Begins an interval: the moment, to be handed to end(). Only while something records.
+  // Begins an interval: the moment on the monotonic clock, to be handed to end(). Only while something records.
   virtual std::chrono::nanoseconds begin() noexcept = 0;
-  // Ends the interval that began at that moment, on the thread where it began. Recorded by whoever recorded all of it.
+  // Ends the interval that began at that moment, on the thread where it began. Recorded by whoever recorded all of it:
+  // a recorder that came later leaves it out.
   virtual void end(const Signpost& signpost, std::chrono::nanoseconds began) noexcept = 0;
-  // A mark of this moment.
+  // A mark of this moment, without a length.
   virtual void mark(const Signpost& signpost) noexcept = 0;
 
  protected:
+  // By the recorder, when the first trace begins and when the last one has ended.
   void setRecording(bool recording) noexcept { recording_.store(recording, std::memory_order_relaxed); }
 
  private:

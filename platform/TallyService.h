@@ -8,12 +8,14 @@
 
 namespace tarn::platform {
 
+// Owned by the platform. Event names are texts with dots, as "sys.oxbow.tarnkit.tarnreportingclientuptime".
 class TallyService {
  public:
+  // Makes the event's payload. It may be called later and on another thread, so it owns what it needs.
   using PayloadCallback = UniqueFunction<plist::Dictionary()>;
 
   virtual ~TallyService() = default;
-  // Whether anybody wants events of this name. Cheap: asked for every message.
+  // Whether anybody wants events of this name; the answer may change from call to call. Cheap: asked for every message.
   virtual bool eventIsInUse(std::string_view name) = 0;
   // Hands an event over whose name is in use: the caller has asked. The callback is called only when the event is
   // recorded, here or later on another thread.

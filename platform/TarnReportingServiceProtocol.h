@@ -17,12 +17,15 @@
 
 namespace tarn::platform {
 
+// What an operation answers in place of results. One operation has one: sendMessage() while reporting is disabled.
 struct RemoteError {
   std::string_view domain;  // a static text
   std::int64_t code = 0;
+  // For people; UTF-8.
   std::string text;
 };
 
+// How an operation answers: with nothing and its results, or with an error and results that mean nothing.
 template <class... Results>
 using Reply = UniqueFunction<void(const std::optional<RemoteError>& error, Results... results)>;
 
@@ -31,37 +34,51 @@ using Acknowledge = Reply<bool>;
 // Absent and empty mean the same to the service: every running session.
 using ReporterIDs = std::optional<std::vector<std::int64_t>>;
 
+// One object a connection, held by it until it is over. Sessions belong to the connection that made them: only it
+// configures, starts, stops and destroys them. A reporter ID that it has no session under, 0 among them, is no error:
+// the operation does nothing and answers as if it had worked. Arguments are in their ranges; a service type, category
+// or type without a meaning is taken like any other.
 class TarnReportingServiceProtocol {
  public:
   virtual ~TarnReportingServiceProtocol() = default;
-  // Makes a session under this ID of the client's choice, in place of the one that it has there.
+  // Makes a session under this ID of the client's choice, in place of the one that it has there. The replaced one is
+  // let go of without being stopped, and the held reply of its start never comes. Answers true.
   virtual void createReportingSession(std::int64_t reporterID, Acknowledge reply) = 0;
-  // Types the session. One that has a type already is replaced by a new one of the new type, not started, which keeps
-  // configuration and latest values.
+  // Types the session. One that has this type already stays as it is. One that has another type is replaced by a new
+  // one of the new type, not started, which keeps configuration and latest values. Answers true.
   virtual void setServiceType(std::uint16_t serviceType, std::int64_t reporterID, Acknowledge reply) = 0;
-  // Despite its name it answers the service type: 65535 for an unknown session.
+  // Despite its name it answers the service type, of any client's session: 65535 for an unknown session.
   virtual void getServiceNameForReporterID(std::int64_t reporterID, Reply<std::uint16_t> reply) = 0;
-  // Merges the configuration into the session's.
+  // Merges the configuration into the session's: its keys get the new values, the others stay. Answers true.
   virtual void setConfiguration(plist::Dictionary configuration, std::int64_t reporterID, Acknowledge reply) = 0;
-  // Makes the workers of the session's type and starts them. The reply is held until the session stops.
+  // Makes the workers of the session's type and starts them. The reply is true and is held until the session stops; it
+  // never comes when the session ends in another way, or ran already (then the first start's stands for both). Unknown
+  // sessions, and test sessions of internal builds, are answered at once.
   virtual void startReportingSessionForID(std::int64_t reporterID, Acknowledge reply) = 0;
-  // Hands each of these sessions a record of the message. Refused with an error while reporting is disabled.
+  // Hands each of these sessions, of whatever client, a record of the message; a session that is named twice gets it
+  // twice. Without IDs each running session gets it, and where none runs one that the service makes for it and ends by
+  // itself. Answers without a result once the sessions took it, or with an error while reporting is disabled. Takes as
+  // long as there are sessions, in slices.
   virtual void sendMessage(plist::Dictionary message, std::uint32_t category, std::uint16_t type,
                            ReporterIDs reporterIDs, Reply<> reply) = 0;
-  // Stops the session, which stays and may be started again; the held reply of its start goes out first.
+  // Stops the session, which stays and may be started again; the held reply of its start goes out first. Answers true,
+  // also for one that doesn't run.
   virtual void stopReportingSessionForID(std::int64_t reporterID, Acknowledge reply) = 0;
-  // Stops the session if it runs, and drops it; the held reply of its start never comes.
+  // Stops the session if it runs, and drops it; the held reply of its start never comes. Answers true.
   virtual void destroyReportingSession(std::int64_t reporterID, Acknowledge reply) = 0;
-  // Answers "reporterID" and "serviceType"; 0 and 65535 for an unknown session.
+  // Answers "reporterID" and "serviceType" of any client's session; 0 and 65535 for an unknown one.
   virtual void reporterID(std::int64_t reporterID, Reply<plist::Dictionary> reply) = 0;
-  // Answers the reporter IDs of all sessions of all clients.
+  // Answers the reporter IDs of all sessions of all clients. Takes as long as there are sessions, in slices: one that
+  // is there all the while is named once.
   virtual void getAllReporters(Reply<std::vector<std::int64_t>> reply) = 0;
-  // Ends the process at once, without a reply.
+  // Ends the process at once, without a reply and without stopping sessions; what back-ends hold is made safe first.
   virtual void killService() = 0;
 
   // No remote operations: what the client has now, for whoever bounds that. Threads: the server queue's.
   virtual std::size_t sessionCount() const { return 0; }
   virtual std::size_t logBytes() const { return 0; }  // memory that the messages of its sessions take
+  // Whether this client has a session under the ID, so that a quota of sessions doesn't count one that is only
+  // replaced.
   virtual bool hasSession(std::int64_t reporterID) const {
     static_cast<void>(reporterID);
     return false;

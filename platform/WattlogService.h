@@ -8,10 +8,12 @@
 
 namespace tarn::platform {
 
+// Owned by the platform, which may lack it.
 class WattlogService {
  public:
   virtual ~WattlogService() = default;
-  // Logs an event of a registered agent. The payload is taken as it is now. There is no result.
+  // Logs an event under the number of an agent that the power log knows: who uses power, and for what. The payload is
+  // taken as it is now; its keys are the event's own. There is no result.
   virtual void logRegisteredEvent(std::int32_t agentIdentifier, std::string_view eventName,
                                   const plist::Dictionary& payload) = 0;
 };

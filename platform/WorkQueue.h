@@ -14,8 +14,10 @@
 
 namespace tarn::platform {
 
+// A piece of work. It is destroyed after it ran, on the queue, before the next piece begins.
 using Work = UniqueFunction<void()>;
 
+// Shared by whoever hands over work; it lives as long as one of them or its work does.
 class WorkQueue {
  public:
   virtual ~WorkQueue() = default;

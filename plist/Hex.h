@@ -1,4 +1,5 @@
-// Bytes in hexadecimal, two small digits each. Stateless. Threads: any.
+// Bytes in hexadecimal, two small digits each: "\x00\x9F" is 009f. For data in texts, metrics' bytes in what is
+// recorded, and characters that can't be shown. Stateless. Threads: any. Allocates for `out` alone.
 #pragma once
 
 #include <string>
@@ -6,6 +7,7 @@
 
 namespace tarn::plist {
 
+// Appends one byte as two digits, the high half first.
 inline void appendHex(std::string& out, char byte) {
   constexpr std::string_view kDigits = "0123456789abcdef";
   const auto value = static_cast<unsigned char>(byte);
@@ -13,6 +15,7 @@ inline void appendHex(std::string& out, char byte) {
   out += kDigits[value & 0xFU];
 }
 
+// Appends all bytes, without blanks between them or a mark before.
 inline void appendHex(std::string& out, std::string_view bytes) {
   for (const char byte : bytes) {
     appendHex(out, byte);

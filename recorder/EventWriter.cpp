@@ -55,7 +55,8 @@ EventWriter::EventWriter(const RecorderOptions& options, platform::Log& log, con
       clock_(clock),
       log_(log),
       file_(options.file, limitsOf(options), clock, options.boot.empty() ? RecorderTime::currentBoot() : options.boot),
-      usage_(options.file, options.folders, capOf(options)) {
+      usage_(options.file, options.folders, capOf(options), options.others),
+      pace_(options.commitWindow, options.fewestWaiting) {
   file_.setLogLimit(logLimit(options));
 }
 
@@ -85,8 +86,9 @@ Status EventWriter::openOnce() {
 void EventWriter::tellWhatOpeningFound() {
   const std::string path = file_.path().string();
   for (const std::string& name : file_.takePutAside()) {
-    log_.error("recorder file " + path +
-               " had something in its log's place that is no regular file; it is set aside as " + name);
+    std::string line = "recorder file " + path;
+    line.append(" had something in its log's place that is no regular file; it is set aside as ").append(name);
+    log_.error(line);
   }
   if (const std::int64_t last = file_.takeGoneUpTo(); last > 0) {
     log_.error("recorder file " + path + " holds nothing of the events up to " + std::to_string(last) +
@@ -172,6 +174,7 @@ Result<std::size_t> EventWriter::writeOnce(const EventBatch& batch, std::size_t 
   if (auto error = openOnce(); error.failed()) return {0, error};
   // What the commit before left in doubt began at the same event.
   if (const std::int64_t in = file_.takeRowsInDoubt(); in > 0) return {static_cast<std::size_t>(in)};
+  const auto begun = clock_.monotonic();
   Status error = file_.begin();
   const SteadyClock::time_point start = SteadyClock::now();
   const auto most = static_cast<std::size_t>(transactionBytes(options_));
@@ -191,10 +194,13 @@ Result<std::size_t> EventWriter::writeOnce(const EventBatch& batch, std::size_t 
   if (error.ok()) {
     error = file_.expire(SteadyClock::now() + kExpireTime);
   }
+  const auto written = clock_.monotonic();
   if (error.ok()) {
     error = file_.commit();
   }
-  return {error.failed() ? 0 : next - from, error};
+  if (error.failed()) return {0, error};
+  pace_.note(next - from, written - begun, clock_.monotonic() - written);
+  return {next - from};
 }
 
 // The two events of a message carry one payload, which becomes text once.

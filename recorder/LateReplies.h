@@ -6,6 +6,9 @@
 // called.
 //
 // Owned by a stand-in. Threads: any; replies on the queue, which is made by the first reply.
+//
+// A reply that is destroyed uncalled means to who waits for it that none will come. Costs one piece of work and one
+// place in a line each; the queue and its thread aren't there before the first.
 #pragma once
 
 #include <chrono>
@@ -22,23 +25,26 @@ namespace tarn::recorder {
 
 class LateReplies {
  public:
+  // How one stand-in answers.
   struct Manner {
     std::string_view queueName;  // a text that lives for ever
     std::size_t most = 1024;     // replies that may wait at once
     std::chrono::nanoseconds delay{0};
   };
 
-  // The work queues outlive this.
+  // The work queues outlive this. Makes no queue yet.
   LateReplies(platform::WorkQueues& workQueues, const Manner& manner) : workQueues_(workQueues), manner_(manner) {}
   LateReplies(const LateReplies&) = delete;
   LateReplies& operator=(const LateReplies&) = delete;
   ~LateReplies() = default;
 
-  // Whether the reply will come; one that won't, because it is closed or too many wait, is still the caller's.
+  // Whether the reply will come; one that won't, because it is closed or too many wait, is still the caller's, who may
+  // answer at once. Nothing waits here.
   [[nodiscard]] bool add(platform::Work&& reply) {
     return add(std::move(reply), [] {});
   }
-  // The same; `taken` is called when the reply will come, and before it comes.
+  // The same; `taken` is called when the reply will come, and before it comes: for what must be recorded first. It runs
+  // under the lock, so it mustn't come back here.
   template <class Action>
   [[nodiscard]] bool add(platform::Work&& reply, Action taken) {
     const MutexLock lock(line_->mutex);
@@ -61,14 +67,17 @@ class LateReplies {
       action();
     }
   }
-  // Takes no more, destroys what waits and waits for the reply that is under way. Not to be called by a reply.
+  // Takes no more, destroys what waits and waits for the reply that is under way. Not to be called by a reply. Safe a
+  // second time.
   void close();
 
  private:
-  // Shared with the work on the queue.
+  // Shared with the work on the queue, which may run after this object's end.
   struct Line {
+    // The queue's work: calls the reply that has waited longest, if close() has left any.
     void answerNext();
 
+    // Held while a reply is taken out, not while it runs.
     Mutex mutex;
     ConditionVariable answered;
     std::list<platform::Work> waiting TARN_GUARDED_BY(mutex);
@@ -81,7 +90,9 @@ class LateReplies {
 
   platform::WorkQueues& workQueues_;
   const Manner manner_;
+  // The replies that wait; what is on the queue holds it, so it may outlive this.
   const std::shared_ptr<Line> line_ = std::make_shared<Line>();
+  // Serial, so replies come one by one.
   std::shared_ptr<platform::WorkQueue> queue_ TARN_GUARDED_BY(line_->mutex);
 };
 

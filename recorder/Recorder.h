@@ -8,6 +8,13 @@
 // record() takes a short lock and counts references: no text is formed, no system call is made while a commit is being
 // gathered. It never drops an event and never waits for the disk; so that what waits stays bounded, whoever takes
 // events in from outside stops doing so while isFull() is true and goes on when the room handler is called.
+//
+//   record() -> incoming_ --swap--> current_ -> EventWriter -> the file
+//               [gathered for some ms]  [the writer thread's own]
+//                                                              '-> committed: flush(), settle(), the room handler
+//
+// Ids are given in the order of hand-over. Nothing is retried by the caller: what the disk refuses stays here until it
+// takes it, or until shutdown() gives it up.
 #pragma once
 
 #include <atomic>
@@ -48,22 +55,28 @@ struct RecorderCounters {
 
 class Recorder {
  public:
+  // Only tells whoever stopped to go on; it must be short, as the writer waits for it.
   using RoomHandler = platform::UniqueFunction<void()>;
 
+  // Log and clock outlive it. Nothing is opened, and no thread made.
   Recorder(RecorderOptions options, platform::Log& log, const platform::Clock& clock);
+  // As shutdown().
   ~Recorder();
   Recorder(const Recorder&) = delete;
   Recorder& operator=(const Recorder&) = delete;
 
   // Called on the writer thread each time isFull() or isCrowded() has become false again. Set before start().
   void setRoomHandler(RoomHandler handler) { roomHandler_ = std::move(handler); }
+  // Maps the counts and makes the writer thread, which opens the file. Called once; what was recorded before is written
+  // then.
   void start();
-  // Waits, once started, until the first attempt to open the file is over, which takes longest with a large file, as it
-  // is read through.
+  // Blocks, once started, until the first attempt to open the file is over, which takes longest with a large file, as
+  // it is read through. Whether it succeeded isn't told: the writer goes on trying.
   void waitUntilOpened();
   // Commits what waits and closes the file, refusing what is handed over from now on; a disk that fails gets a few last
-  // tries, then what waits counts as failed. Called once, on the thread that called start(); the destructor does it
-  // otherwise.
+  // tries (RecorderOptions::shutdownTries), then what waits counts as failed and an error line tells how much and why.
+  // Blocks for that. Called once, on the thread that called start(); the destructor does it otherwise. Without start()
+  // it does nothing.
   void shutdown();
 
   // Hands an event over, before start() too; `backend` must be a text that lives for ever, `time` is in epoch seconds.
@@ -71,14 +84,17 @@ class Recorder {
   // any.
   void record(std::string_view backend, std::string_view name, plist::Dictionary payload, plist::Dictionary detail,
               double time);
-  // Whether events should not be brought in for now: too many wait, or the oldest for too long. Threads: any.
+  // Whether events should not be brought in for now: too many wait, or the oldest for too long. A load or two, with a
+  // look at the clock while events wait; asked for each request. It stays true until the low marks are reached and the
+  // room handler is called. Threads: any.
   bool isFull() noexcept;
-  // Whether it will soon be full, if those that bring in most go on. Threads: any.
+  // Whether it will soon be full, if those that bring in most go on: from three quarters of the high marks on. Threads:
+  // any.
   bool isCrowded() const noexcept { return crowded_.load(std::memory_order_relaxed); }
   // All counters of one moment. Threads: any.
   RecorderCounters counters() const;
-  // Commits what was handed over before the call without waiting for company. Whether all of it is committed; false
-  // when the time is up or when it was given up. Threads: any but the writer's.
+  // Commits what was handed over before the call without waiting for company, blocking for at most `timeout`. Whether
+  // all of it is committed; false when the time is up or when any event was given up. Threads: any but the writer's.
   [[nodiscard]] bool flush(std::chrono::milliseconds timeout);
   // The same without waiting here: once all that was handed over before the call is committed, `done` becomes work of
   // the queue (at once when it is committed already), in the order of the calls. Destroyed uncalled when some of it is
@@ -86,7 +102,7 @@ class Recorder {
   void settle(std::shared_ptr<platform::WorkQueue> queue, platform::Work done) {
     settle(settlement(std::move(queue), std::move(done)));
   }
-  // In two steps, of which the second needs no memory.
+  // The same in two steps, of which the second needs no memory.
   struct Settling;
   using Settlement = std::list<std::shared_ptr<Settling>>;
   static Settlement settlement(std::shared_ptr<platform::WorkQueue> queue, platform::Work done);
@@ -95,31 +111,50 @@ class Recorder {
  private:
   using TimePoint = std::chrono::steady_clock::time_point;
 
+  // The writer thread's whole life.
   void run();
+  // Where memory is missing for a step of the writer's, it failed, as with a disk that fails.
   template <class Step>
   bool tryTo(Step step) noexcept;
+  // An error line, or a short one where there is no memory for it.
   template <class Text>
   void tell(Text text) noexcept;
   void keepCounts() TARN_REQUIRES(mutex_);
+  // Maps that file; without it nothing is counted along, and a kill costs an unknown number.
   void openCounts();
+  // Once the file is open: what the run before had handed over less what the file holds.
   void tellWhatWasLost();
+  // Sleeps until an event comes or upkeep is due, then gathers.
   void waitForWork() TARN_REQUIRES(mutex_);
+  // Waits for company, within the times of RecorderOptions: what a commit costs the disk is its synchronising, however
+  // many events it holds.
   void gather() TARN_REQUIRES(mutex_);
+  // The pause after a fault, longer each time.
   void waitForRetry() TARN_REQUIRES(mutex_);
+  // The next commit of the current group; false for a fault.
   bool writeCurrent() TARN_REQUIRES(mutex_);
+  // Retention's next step, and when the one after it is due.
   bool maintain() TARN_REQUIRES(mutex_);
+  // The next piece of the check, and when the one after it is due.
   bool verify() TARN_REQUIRES(mutex_);
+  // Sets what isFull() and isCrowded() tell, after an event came.
   void noteUse() noexcept TARN_REQUIRES(mutex_);
+  // Since when the oldest event waits, after some were committed.
   void noteOldest() TARN_REQUIRES(mutex_);
+  void notePace() TARN_REQUIRES(mutex_);
   bool hasRoom() const TARN_REQUIRES(mutex_);
+  // So many are committed: the counts, those who wait, and the room handler where there is room again.
   void account(std::size_t events, std::size_t bytes) TARN_REQUIRES(mutex_);
+  // False where memory is missing for an answer: it is still owed.
   bool answerSettled() TARN_REQUIRES(mutex_);
   static bool answer(const std::shared_ptr<Settling>& settled) noexcept;
   void giveUp() TARN_REQUIRES(mutex_);
   // Of what was handed over, that which is to be committed.
   std::uint64_t accepted() const noexcept TARN_REQUIRES(mutex_) { return handedOver_ - failed_; }
+  // Whether any was given up that had been taken.
   bool hasGivenUp() const noexcept TARN_REQUIRES(mutex_) { return failed_ != withoutMemory_; }
   bool hasWaiting() const noexcept TARN_REQUIRES(mutex_) { return committed_ + failed_ != handedOver_; }
+  // Whether somebody waits for a commit: then it isn't put off for company.
   bool isAwaited() const noexcept TARN_REQUIRES(mutex_) { return committed_ < awaited_; }
 
   const RecorderOptions options_;
@@ -130,8 +165,10 @@ class Recorder {
 
   // The writer thread's own.
   EventWriter writer_;
+  // The group that is being written; kept whole until all of it is committed, so a fault in the middle loses nothing.
   EventBatch current_;
   std::size_t position_ = 0;  // in current_: what stands before it is committed
+  // After the next fault.
   std::chrono::milliseconds retry_;
   bool shortage_ = false;  // the last step failed for want of memory
   TimePoint nextMaintenance_;
@@ -139,6 +176,7 @@ class Recorder {
   TimePoint currentSince_;              // of the first event in current_
   std::optional<HandOverCounts> left_;  // by the run before, until its loss is told
 
+  // What isFull() and isCrowded() look at without the lock; written under it.
   std::atomic<bool> full_{false};
   std::atomic<bool> crowded_{false};
   // Of the oldest event that waits, in the steady clock's ticks; 0 when none does.
@@ -146,8 +184,10 @@ class Recorder {
   mutable Mutex mutex_;
   ConditionVariable work_;  // for the writer thread
   ConditionVariable done_;  // for those who wait for it
+  // Since the group that is being written was taken.
   EventBatch incoming_ TARN_GUARDED_BY(mutex_);
   TimePoint incomingSince_ TARN_GUARDED_BY(mutex_);
+  // As EventBatch counts them, of both batches.
   std::size_t waitingBytes_ TARN_GUARDED_BY(mutex_) = 0;
   std::uint64_t handedOver_ TARN_GUARDED_BY(mutex_) = 0;
   std::uint64_t committed_ TARN_GUARDED_BY(mutex_) = 0;
@@ -160,6 +200,7 @@ class Recorder {
   std::int64_t lastId_ TARN_GUARDED_BY(mutex_) = 0;  // of the last committed event
   bool countsOpen_ TARN_GUARDED_BY(mutex_) = false;
   bool busy_ TARN_GUARDED_BY(mutex_) = false;          // the last group was large
+  std::size_t most_ TARN_GUARDED_BY(mutex_);           // events that may wait, at the pace of the last commits
   std::uint64_t awaited_ TARN_GUARDED_BY(mutex_) = 0;  // accepted before the last flush() or settle()
   Settlement settling_ TARN_GUARDED_BY(mutex_);
   bool asleep_ TARN_GUARDED_BY(mutex_) = false;  // the writer waits for the first event of a group
@@ -167,6 +208,14 @@ class Recorder {
   bool stopping_ TARN_GUARDED_BY(mutex_) = false;
   bool refusing_ TARN_GUARDED_BY(mutex_) = false;
   bool refusalLogged_ TARN_GUARDED_BY(mutex_) = false;
+};
+
+// One that waits for a commit. Shared with the work that answers it, so that it is still there when no memory was for
+// that work.
+struct Recorder::Settling {
+  std::uint64_t target;  // committed when so many are
+  std::shared_ptr<platform::WorkQueue> queue;
+  platform::Work done;
 };
 
 }  // namespace tarn::recorder

@@ -1,44 +1,58 @@
-// RecorderOptions: where the recorder writes and every bound that it keeps, with what happens at each.
+// RecorderOptions: where the recorder writes and every bound that it keeps, with what happens at each. Plain data, read
+// once when the recorder is made; the configuration sets the retention, the rest are constants but for tests.
 #pragma once
 
+#include <atomic>
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <filesystem>
+#include <memory>
 #include <string>
 #include <vector>
 
 namespace tarn::recorder {
 
 struct RecorderOptions {
+  // The database; its log, the log's index, the counts and files set aside lie beside it under names that begin with
+  // its own.
   std::filesystem::path file;
 
   // Retention: beyond either, the oldest events go first. A megabyte is 2^20 bytes; at least one is kept. The size is
   // that of the database with its log, of files set aside, and of the files in these folders; see StateUsage.
   std::int64_t maxMegabytes = 256;
   std::vector<std::filesystem::path> folders;
+  // What else counts as part of that size: bytes that others keep for a while; null: none.
+  std::shared_ptr<const std::atomic<std::int64_t>> others;
   double maxAgeDays = 30;
-  // How often an idle recorder looks for events that have grown too old.
+  // How often an idle recorder looks for events that have grown too old. Ages are days, so a minute is soon enough; a
+  // busy one looks with each commit.
   std::chrono::milliseconds maintenanceInterval{60'000};
 
   // Commits: a group is written this long after its first event at the latest, earlier when nothing new has come for
-  // the quiet time or when the group is large. While many come, company is worth more time.
+  // the quiet time or when the group is large. While many come (the last group had busyGroupEvents), company is worth
+  // more time.
   std::chrono::milliseconds groupTime{4};
   std::chrono::milliseconds quietTime{1};
   std::chrono::milliseconds busyGroupTime{20};
   std::size_t busyGroupEvents = 512;
+  // A group of this size is written at once.
   std::size_t groupEvents = 4096;
   std::size_t groupBytes = std::size_t{4} << 20;
 
   // Waiting events: from the high marks on isFull() is true, from three quarters of them on isCrowded(), until both low
-  // marks are reached. They are low enough for what waits to be written within the time that a crash may cost.
+  // marks are reached.
   std::size_t highWaterEvents = 16'384;
   std::size_t lowWaterEvents = 8'192;
   std::size_t highWaterBytes = std::size_t{16} << 20;
   std::size_t lowWaterBytes = std::size_t{8} << 20;
 
-  // From this age of the oldest waiting event on isFull() is true too: with the time of a commit it is within what a
-  // crash may cost.
+  // The high mark is lower while disk or processor are slow: as many events as are committed in this time, at the pace
+  // that is measured, but so many at the least. What a crash may cost is 200 ms; the rest is for a pace that changes.
+  std::chrono::milliseconds commitWindow{120};
+  std::size_t fewestWaiting = 256;
+
+  // From this age of the oldest waiting event on isFull() is true too: no pace tells that a commit will stall.
   std::chrono::milliseconds oldestWaiting{100};
 
   // How often a piece of the file is compared with its checksums, and for how long: half of a hundredth of the time.
@@ -47,16 +61,17 @@ struct RecorderOptions {
   std::chrono::milliseconds verifyTime{5};
   std::chrono::milliseconds verifyRest{6 * 3'600'000};
 
-  // A log beyond this is told, with the readers that hold it up.
+  // A log beyond this is told, once each time, with the readers that hold it up; nothing else is done about it.
   std::int64_t longLogBytes = std::int64_t{64} << 20;
 
   // What tells this boot of the system from others; the kernel's own name for it when empty.
   std::string boot;
 
-  // After a fault the next try comes after the first pause, each further one after twice as long, up to the last.
+  // After a fault the next try comes after the first pause, each further one after twice as long, up to the last: a
+  // disk that comes back is found within a second, and one that doesn't costs next to nothing.
   std::chrono::milliseconds firstRetry{250};
   std::chrono::milliseconds lastRetry{1000};
-  // How often a shutdown tries a disk that fails before what waits is given up.
+  // How often a shutdown tries a disk that fails before what waits is given up, and the pause between two tries.
   int shutdownTries = 3;
   std::chrono::milliseconds shutdownRetry{100};
 

@@ -1,5 +1,6 @@
 // RecorderPylonService: the metric service as the recorder stands in for it. A metric is recorded under back-end
-// "pylon" by its identifier: the fields of its text rendering, and its bytes on the wire as `wire`, in hexadecimal.
+// "pylon" by its identifier in decimal: the fields of its text rendering, and its bytes on the wire as `wire`, in
+// lower-case hexadecimal. So a metric can be read by people and compared byte by byte.
 //
 // Owner: the platform. Threads: the server queue.
 #pragma once
@@ -19,6 +20,7 @@ class RecorderPylonService : public platform::PylonService {
   RecorderPylonService(Recorder& recorder, const platform::Clock& clock) noexcept
       : recorder_(recorder), clock_(clock) {}
 
+  // Forms the text fields and the bytes here and now. Nothing fails and nothing waits.
   void post(std::uint32_t metricIdentifier, const platform::MetricRecord& record) override;
 
  private:

@@ -27,6 +27,7 @@ class Recorder;
 
 class RecorderRtcReportingService final : public platform::RtcReportingService {
  public:
+  // How it answers, as tests and trials want it; the defaults are a back-end that is well.
   struct Behaviour {
     bool available = true;                          // false: no token is handed out
     std::vector<std::string> backends{"recorder"};  // what a start's completion reports
@@ -40,22 +41,30 @@ class RecorderRtcReportingService final : public platform::RtcReportingService {
                               const Behaviour& behaviour);
   RecorderRtcReportingService(const RecorderRtcReportingService&) = delete;
   RecorderRtcReportingService& operator=(const RecorderRtcReportingService&) = delete;
-  // Completions that have not come by then never come.
+  // Completions that have not come by then never come; one that runs is waited for.
   ~RecorderRtcReportingService() override;
 
+  // "rtc-token-N", N counting from 1 in each run; nothing when the configuration hands out none. The parent isn't
+  // looked at.
   std::optional<std::string> newHierarchyToken(const std::optional<std::string>& parentToken) override;
+  // Never null; recorded even if it is never started. The frameworks aren't looked at. Up to 65536 completions may be
+  // late at once; further ones come within the call.
   std::shared_ptr<platform::RtcReportingSession> createSession(
       const plist::Dictionary& sessionInfo, const plist::Dictionary& userInfo,
       const std::optional<std::vector<std::string>>& frameworksToCheck) override;
 
  private:
+  // The completions of starts; a session's calls, each recorded as it is made.
   class Completions;
   class Session;
 
   Recorder& recorder_;
   const platform::Clock& clock_;
+  // Of the configuration.
   const bool available_;
+  // Sessions hold it weakly: after the service's end a start is answered by nobody.
   const std::shared_ptr<Completions> completions_;
+  // Numbers given so far.
   std::atomic<std::uint64_t> tokens_{0};
   std::atomic<std::int64_t> sessions_{0};
 };

@@ -29,19 +29,23 @@ class RecorderSnareService : public platform::SnareService {
   // Replies that may wait at once. They wait for a few log lines each, so this is far more than there ever are.
   static constexpr std::size_t kMostWaitingReplies = 1024;
 
-  // `refuse`: the reason with which all requests are refused. The others outlive this.
+  // `refuse`: the reason with which all requests are refused, nothing for none. The others outlive this. No queue is
+  // made before the first request.
   RecorderSnareService(Recorder& recorder, const platform::Clock& clock, platform::RandomSource& randomSource,
                        platform::WorkQueues& workQueues, std::optional<platform::SnareReason> refuse);
   ~RecorderSnareService() override;
   RecorderSnareService(const RecorderSnareService&) = delete;
   RecorderSnareService& operator=(const RecorderSnareService&) = delete;
 
+  // A new one, never null. All of them share the service's line of replies.
   std::shared_ptr<platform::SnareReporter> createReporter() override;
 
  private:
+  // Takes and answers requests, for the service and for reporters that outlive it.
   class Intake;
   class Reporter;
 
+  // Shared with the reporters, closed at the end of this.
   const std::shared_ptr<Intake> intake_;
 };
 

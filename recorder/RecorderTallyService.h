@@ -19,30 +19,38 @@ class Recorder;
 
 class RecorderTallyService : public platform::TallyService {
  public:
-  // Names whose answers are remembered; when there are more, all are forgotten and asked for again.
+  // Names whose answers are remembered; when there are more, all are forgotten and asked for again. Names come from
+  // clients, so there may be any number.
   static constexpr std::size_t kRememberedNames = 4096;
-  // Longer names are never remembered.
+  // Longer names, in bytes, are never remembered: with the bound above that is a megabyte of names at the most.
   static constexpr std::size_t kLongestRememberedName = 256;
 
   // `inUse`: patterns of the wanted names (see globMatches). The recorder and the clock outlive this.
   RecorderTallyService(Recorder& recorder, const platform::Clock& clock, std::vector<std::string> inUse);
 
+  // Whether a pattern matches the whole name. The patterns are asked once for each name that is remembered; with "*"
+  // among them, or with none, nothing is looked up.
   bool eventIsInUse(std::string_view name) override;
-  // The payload is asked for here and now, so that the recorder holds it as it is at hand-over.
+  // The payload is asked for here and now, so that the recorder holds it as it is at hand-over. Whether the name is in
+  // use isn't asked again.
   void sendEventLazy(std::string_view name, PayloadCallback payload) override;
 
  private:
+  // So that a look-up of a name that is no string of its own makes none.
   struct NameHash {
     using is_transparent = void;
     std::size_t operator()(std::string_view name) const noexcept { return std::hash<std::string_view>()(name); }
   };
 
+  // Takes time with the number of patterns.
   bool matchesAny(std::string_view name) const noexcept;
 
   Recorder& recorder_;
   const platform::Clock& clock_;
+  // As the configuration has them; they don't change.
   const std::vector<std::string> inUse_;
   const bool all_;  // one of the patterns is "*"
+  // Name, and whether it is in use. Of the server queue alone, so without a lock.
   std::unordered_map<std::string, bool, NameHash, std::equal_to<>> remembered_;
 };
 

@@ -1,5 +1,6 @@
 // RecorderWattlogService: the power log as the recorder stands in for it. An event is recorded under back-end "wattlog"
-// by its name, with the agent that logged it as `agent`.
+// by its name, with the agent that logged it as `agent`. Every event is wanted here: unlike analytics events, nobody
+// asks beforehand.
 //
 // Owner: the platform. Threads: the server queue.
 #pragma once
@@ -20,6 +21,7 @@ class RecorderWattlogService : public platform::WattlogService {
   RecorderWattlogService(Recorder& recorder, const platform::Clock& clock) noexcept
       : recorder_(recorder), clock_(clock) {}
 
+  // Recorded at once with the payload as it is; nothing fails, and there is no reply.
   void logRegisteredEvent(std::int32_t agentIdentifier, std::string_view eventName,
                           const plist::Dictionary& payload) override;
 

@@ -1,6 +1,8 @@
 // TarnReportingMessageCounts: what became of the messages that clients sent. Each message that was dealt with is in
 // exactly one of the members; of several sessions' outcomes the best counts, in the order of TarnReportingOutcome.
 // Plain data.
+//
+// The service holds one and `status` tells it, so that an operator sees whether what clients send arrives anywhere.
 #pragma once
 
 #include <array>
@@ -9,6 +11,8 @@
 
 namespace tarn {
 
+// From best to worst: a smaller number is the better outcome, and so the lesser of two is what a message with several
+// sessions counts as.
 enum class TarnReportingOutcome : std::uint8_t {
   Delivered,       // a session took it as news and a worker got it
   Redundant,       // it said what the session's last one of its kind had said
@@ -18,9 +22,12 @@ enum class TarnReportingOutcome : std::uint8_t {
   Refused,         // reporting is disabled, or memory was missing in the middle of it
 };
 
+// Counts since the process began; they never go down. Threads: the server queue.
 struct TarnReportingMessageCounts {
+  // By the number of the outcome.
   std::array<std::uint64_t, 6> counts{};
 
+  // One message more with this outcome, and how many there were.
   void add(TarnReportingOutcome outcome) noexcept { ++counts[static_cast<std::size_t>(outcome)]; }
   std::uint64_t of(TarnReportingOutcome outcome) const noexcept { return counts[static_cast<std::size_t>(outcome)]; }
 };

@@ -77,13 +77,12 @@ void TarnReportingMessageDelivery::proceed(const std::weak_ptr<TarnReportingServ
 }
 
 void TarnReportingMessageDelivery::giveWay(const std::weak_ptr<TarnReportingServiceDelegateProtocol>& delegate) {
-  gaveWay_ = found_;
   TarnReportingContinueLater([delegate, rest = std::move(*this)]() mutable { rest.proceed(delegate); });
 }
 
 void TarnReportingMessageDelivery::handOver(const std::shared_ptr<TarnReportingSession>& session, bool isLast) {
-  if (gaveWay_ && isForWhoeverRuns() && !session->started()) {
-    improve(outcome_, TarnReportingOutcome::Undeliverable);  // it was stopped meanwhile
+  if (isForWhoeverRuns() && !session->started()) {
+    improve(outcome_, TarnReportingOutcome::Undeliverable);  // it was stopped while others had their turn
     return;
   }
   // Each session changes its own; the last one, mostly the only one, needs no copy for it.

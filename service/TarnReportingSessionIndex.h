@@ -17,6 +17,8 @@ namespace tarn {
 
 class TarnReportingClientServerInstance;
 
+// All operations but addRunning() and the counts are a hash look-up and, for IDs that many clients use, a search
+// through those. It holds clients by plain pointers: a client's map takes itself out before the client goes.
 class TarnReportingSessionIndex {
  public:
   using Client = TarnReportingClientServerInstance;
@@ -27,17 +29,22 @@ class TarnReportingSessionIndex {
   TarnReportingSessionIndex(const TarnReportingSessionIndex&) = delete;
   TarnReportingSessionIndex& operator=(const TarnReportingSessionIndex&) = delete;
 
-  // The client has one more session, or one less, under this ID. Without the memory for one more nothing has changed.
+  // The client has one more session, or one less, under this ID. `number` is the client's place in the order of
+  // connection. The caller adds an ID of a client once; removing what isn't there changes nothing. Without the memory
+  // for one more nothing has changed.
   void add(std::int64_t reporterID, std::uint64_t number, Client& client);
   void remove(std::int64_t reporterID, std::uint64_t number);
-  // So many more sessions run; fewer, when it is negative.
+  // So many more sessions run; fewer, when it is negative. Which ones run is known to the clients' maps alone.
   void addRunning(std::ptrdiff_t count) noexcept { running_ += static_cast<std::size_t>(count); }
 
-  // The first client in the order of connection that has a session under this ID; null for none.
+  // The first client in the order of connection that has a session under this ID; null for none. Whether its session
+  // runs doesn't matter.
   Client* firstHolder(std::int64_t reporterID) const;
-  // Those that have sessions.
+  // Those that have sessions. In the order of connection, so what goes through them always goes in the same order.
   const Clients& clients() const noexcept { return clients_; }
+  // Of all clients together, without the single-message session, which is no client's.
   std::size_t sessionCount() const noexcept { return sessionCount_; }
+  // Those of them that are started.
   std::size_t runningCount() const noexcept { return running_; }
 
  private:
@@ -46,10 +53,12 @@ class TarnReportingSessionIndex {
     Client* client;
   };
 
+  // Whether it was one. Leaves the counts alone.
   bool removeHolder(std::int64_t reporterID, std::uint64_t number) noexcept;
 
   // In the order of the clients. Mostly one; but a thousand clients may all number their sessions from 1.
   std::unordered_map<std::int64_t, std::vector<Holder>> holders_;
+  // How many a client has, by its number: the first and the last one put the client in and take it out.
   std::unordered_map<std::uint64_t, std::size_t> sessionsOf_;
   Clients clients_;
   std::size_t sessionCount_ = 0;

@@ -22,8 +22,10 @@
 #include "host/settings/ServiceOptions.h"
 #include "service/TarnReportingService.h"
 #include "service/TarnReportingWorkerClasses.h"
+#include "service/vocabulary/ProcessState.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
 #include "session/TarnReportingSession.h"
+#include "session/TarnReportingSessionLogMemory.h"
 
 namespace tarn {
 namespace {
@@ -64,6 +66,8 @@ ServiceCounts countsOf(const TarnReportingService& service) {
   counts.undeliverable = messages.of(TarnReportingOutcome::Undeliverable);
   counts.withoutSession = messages.of(TarnReportingOutcome::WithoutSession);
   counts.refused = messages.of(TarnReportingOutcome::Refused);
+  const TarnReportingSessionLogMemory::Usage logs = ProcessState::of<TarnReportingSessionLogMemory>()->usage();
+  counts.logs = {logs.bytes, logs.overflowBytes, logs.overflowing, logs.failures, logs.lost};
   return counts;
 }
 

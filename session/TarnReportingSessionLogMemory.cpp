@@ -24,11 +24,6 @@ constexpr std::size_t kRecordBytes = 64;
 constexpr std::size_t kBlockBytes = 16;
 constexpr std::size_t kKeyBytes = 56;
 
-// Of a list of this size; -1 for an empty one.
-int rowOf(std::size_t bytes) noexcept {
-  return static_cast<int>(std::bit_width(bytes)) - 1;
-}
-
 }  // namespace
 
 TarnReportingSessionLogMemory::TarnReportingSessionLogMemory()
@@ -60,9 +55,7 @@ void TarnReportingSessionLogMemory::add(List& list, std::size_t bytes) {
   if (list.account_) {
     list.account_->bytes += bytes;
   }
-  if (rowOf(list.bytes_) != list.link_.row) {
-    place(list);
-  }
+  place(list);
 }
 
 void TarnReportingSessionLogMemory::subtract(List& list, std::size_t bytes) noexcept {
@@ -71,30 +64,28 @@ void TarnReportingSessionLogMemory::subtract(List& list, std::size_t bytes) noex
   if (list.account_) {
     list.account_->bytes -= bytes;
   }
-  if (failing_) {
-    retryAt_ = std::min(retryAt_, bytesInMemory() + kRetryBytes);
+  if (retryAt_) {
+    retryAt_ = std::min(*retryAt_, bytesInMemory() + kRetryBytes);
   }
   place(list);
 }
 
 void TarnReportingSessionLogMemory::relieve(List& list) {
-  if (list.bytes_ <= bounds_.bytesOfSession && bytesInMemory() <= bounds_.bytesInAll) return;
   try {
     while (list.bytes_ > bounds_.bytesOfSession && mayTry() && list.moveOldest()) {
     }
-    while (bytesInMemory() > bounds_.bytesInAll && mayTry() && relieveLargest()) {
+    while (bytesInMemory() > bounds_.bytesInAll && relieveLargest()) {
     }
   } catch (const std::bad_alloc&) {
-    toldFailure(Error{0, "out of memory"});  // the message is in its log, and that is what counts
+    toldFailure(Error{.text = "out of memory"});  // the message is in its log, and that is what counts
   }
 }
 
 // Lists in the way that can't give anything now are those that are gone through.
 bool TarnReportingSessionLogMemory::relieveLargest() {
   for (auto row = rows_.rbegin(); row != rows_.rend(); ++row) {
-    for (List* list = *row; list != nullptr; list = list->link_.next) {
+    for (List* list = *row; list != nullptr && mayTry(); list = list->link_.next) {
       if (list->moveOldest()) return true;
-      if (!mayTry()) return false;
     }
   }
   return false;
@@ -102,43 +93,38 @@ bool TarnReportingSessionLogMemory::relieveLargest() {
 
 void TarnReportingSessionLogMemory::toldFailure(const Error& error) {
   ++failures_;
-  retryAt_ = bytesInMemory() + kRetryBytes;
-  if (std::exchange(failing_, true)) return;
-  kLog(LogLevel::Error, "no room for messages beyond the bound of the logs, they stay in memory: %@", error.text);
+  if (!std::exchange(retryAt_, bytesInMemory() + kRetryBytes)) {
+    kLog(LogLevel::Error, "no room for messages beyond the bound of the logs, they stay in memory: %@", error.text);
+  }
 }
 
 void TarnReportingSessionLogMemory::toldSuccess() {
-  retryAt_ = 0;
-  if (std::exchange(failing_, false)) {
+  if (std::exchange(retryAt_, std::nullopt)) {
     kLog(LogLevel::Default, "there is room again for messages beyond the bound of the logs");
   }
 }
 
 void TarnReportingSessionLogMemory::place(List& list) noexcept {
-  const int row = rowOf(list.bytes_);
-  if (row == list.link_.row) return;
-  unplace(list);
-  if (row < 0) return;
-  List*& first = rows_[static_cast<std::size_t>(row)];
-  list.link_ = {nullptr, first, row};
-  if (first != nullptr) {
-    first->link_.previous = &list;
+  Link& link = list.link_;
+  const bool isEmpty = list.size() == list.overflowed();
+  List** const row = isEmpty ? nullptr : &rows_[static_cast<std::size_t>(std::bit_width(list.bytes_))];
+  if (row != link.row) {
+    if (link.row != nullptr) {
+      point(link.at, link.next);
+    }
+    link.row = row;
+    if (row != nullptr) {
+      point(&link.next, *row);
+      point(row, &list);
+    }
   }
-  first = &list;
 }
 
-void TarnReportingSessionLogMemory::unplace(List& list) noexcept {
-  const Link link = list.link_;
-  if (link.row < 0) return;
-  if (link.previous != nullptr) {
-    link.previous->link_.next = link.next;
-  } else {
-    rows_[static_cast<std::size_t>(link.row)] = link.next;
+void TarnReportingSessionLogMemory::point(List** at, List* list) noexcept {
+  *at = list;
+  if (list != nullptr) {
+    list->link_.at = at;
   }
-  if (link.next != nullptr) {
-    link.next->link_.previous = link.previous;
-  }
-  list.link_ = {};
 }
 
 }  // namespace tarn

@@ -15,7 +15,9 @@
 #include <array>
 #include <cstddef>
 #include <cstdint>
+#include <limits>
 #include <memory>
+#include <optional>
 
 #include "platform/OverflowStore.h"
 #include "plist/Dictionary.h"
@@ -25,13 +27,15 @@ namespace tarn {
 
 class TarnReportingSessionMessageList;
 
-// The memory that the logs of one owner's sessions take.
+// The memory that the logs of one owner's sessions take. Bytes as costOf() estimates them. The owner reads it to hold a
+// client to its quota.
 struct TarnReportingSessionLogAccount {
   std::size_t bytes = 0;
 };
 
 class TarnReportingSessionLogMemory {
  public:
+  // What `status` shows of it.
   struct Usage {
     std::size_t bytes = 0;          // in memory
     std::size_t overflowBytes = 0;  // in the store
@@ -42,10 +46,12 @@ class TarnReportingSessionLogMemory {
     bool operator==(const Usage&) const = default;
   };
 
+  // Takes the store and its bounds from the facilities; without a store nothing is ever moved.
   TarnReportingSessionLogMemory();
   TarnReportingSessionLogMemory(const TarnReportingSessionLogMemory&) = delete;
   TarnReportingSessionLogMemory& operator=(const TarnReportingSessionLogMemory&) = delete;
 
+  // At this moment; failures and losses since the process began.
   Usage usage() const noexcept;
 
  private:
@@ -55,37 +61,50 @@ class TarnReportingSessionLogMemory {
 
   // A place in a row of lists of about the same size.
   struct Link {
-    List* previous = nullptr;
+    List** row = nullptr;  // null: in none
+    List** at = nullptr;   // what points to the list: the row, or the link of the list before
     List* next = nullptr;
-    int row = -1;  // none
   };
-  static constexpr int kRows = 64;
+  // One for each power of two that a size may have.
+  static constexpr std::size_t kRows = std::numeric_limits<std::size_t>::digits + 1;
+  // As many shapes as a connection may declare; a slot holds one, and two that share a slot pay for their keys in
+  // turns.
   static constexpr std::size_t kKnownShapes = 1024;
 
   // What a record takes, its share of keys included.
   std::size_t costOf(const TarnReportingSessionMessage& record) noexcept;
+  // Books them with the process, the list and its owner's account, and moves the list to another row when it is time.
   void add(List& list, std::size_t bytes);
+  // The opposite. While the store fails it also brings the next attempt nearer, as there is less in memory.
   void subtract(List& list, std::size_t bytes) noexcept;
   // Moves messages to the store until both bounds are kept again, or it takes no more.
   void relieve(List& list);
+  // Moves a chunk of the largest list that can give one; false when none can or the store failed.
   bool relieveLargest();
+  // Pages count that the store had no room for.
   std::size_t bytesInMemory() const noexcept { return bytes_ + pageCounts_->bytesInMemory; }
-  bool mayTry() const noexcept { return store_ != nullptr && bytesInMemory() >= retryAt_; }
+  // After a failure not before memory has grown by a further mebibyte, or a full disk would be asked for every message.
+  bool mayTry() const noexcept { return store_ != nullptr && (!retryAt_ || bytesInMemory() >= *retryAt_); }
+  // An error line for the first of failures in a row, and one more line when the store takes messages again.
   void toldFailure(const Error& error);
+  // From then on it is tried again whenever a bound is exceeded.
   void toldSuccess();
-  // Puts the list into the row of its size.
+  // Puts the list into the row of its size; an empty one into none.
   void place(List& list) noexcept;
-  void unplace(List& list) noexcept;
+  static void point(List** at, List* list) noexcept;
 
   platform::OverflowStore* const store_;
   const platform::OverflowStore::Bounds bounds_;
+  // 128 KiB, or an eighth of a session's bound when that is less: large enough that a page is worth a write, small
+  // enough that two opened pages are no burden.
   const std::size_t chunkBytes_;  // that are moved at once
   std::size_t bytes_ = 0;
   std::size_t overflowing_ = 0;
   std::uint64_t failures_ = 0;
-  bool failing_ = false;
-  std::size_t retryAt_ = 0;
+  // The last attempt failed; the memory in bytes at which the next one is made.
+  std::optional<std::size_t> retryAt_;
   const std::shared_ptr<Page::Counts> pageCounts_ = std::make_shared<Page::Counts>();
+  // The first list of each row; lists link themselves.
   std::array<List*, kRows> rows_{};
   // Key lists are shared by all messages of a shape: who brings one that wasn't seen lately pays for it.
   std::array<std::uint64_t, kKnownShapes> knownShapes_{};

@@ -8,6 +8,7 @@
 #pragma once
 
 #include <atomic>
+#include <cstdint>
 #include <deque>
 #include <memory>
 #include <string>
@@ -24,23 +25,36 @@ class TarnReportingSessionMessage;
 
 using TarnReportingSessionMessages = std::deque<std::shared_ptr<TarnReportingSessionMessage>>;
 
+// A new record isn't redundant, says that the session isn't started, and is addressed to everyone. The session sets the
+// first two as it takes the record in; a producer that addresses a derived message sets the destinations before that.
 class TARN_CAPABILITY TarnReportingSessionMessage {
  public:
   // Names of worker classes; the texts are static.
   using DestinationWorkers = std::vector<std::string_view>;
+  // Category and type in one number.
+  using Kind = std::uint64_t;
 
+  // Shares the payload with the caller until one of the two writes to it.
   TarnReportingSessionMessage(plist::Dictionary message, AudioEventCategory category, AudioEventType type)
       : message_(std::move(message)), category_(category), type_(type) {}
   TarnReportingSessionMessage(const TarnReportingSessionMessage&) = delete;
   TarnReportingSessionMessage& operator=(const TarnReportingSessionMessage&) = delete;
 
+  // The payload; only the session and producers at its stop change that of a record which others hold.
   const plist::Dictionary& message() const noexcept { return message_; }
+  // To be written to, under the record's guard where somebody else may hold the record.
   plist::Dictionary& mutableMessage() noexcept { return message_; }
+  // With the type: what kind of message it is, for good.
   AudioEventCategory category() const noexcept { return category_; }
   AudioEventType type() const noexcept { return type_; }
+  Kind kind() const noexcept { return kindOf(category_, type_); }
+  static Kind kindOf(AudioEventCategory category, AudioEventType type) noexcept {
+    return Kind{static_cast<std::uint32_t>(category)} << 16U | static_cast<std::uint16_t>(type);
+  }
 
   // Whether the message repeats an earlier one of its session.
   bool isRedundant() const noexcept { return isRedundant_; }
+  // For the session's intake, as is setIsSessionStarted().
   void setIsRedundant(bool redundant) noexcept { isRedundant_ = redundant; }
   // Whether the session was started when the message arrived.
   bool isSessionStarted() const noexcept { return isSessionStarted_; }
@@ -48,6 +62,7 @@ class TARN_CAPABILITY TarnReportingSessionMessage {
 
   // The classes whose workers alone handle the message; empty means every consumer.
   const DestinationWorkers& destinationWorkers() const noexcept;
+  // An empty list addresses everyone again. Few messages have one, so a record holds a pointer to it.
   void setDestinationWorkers(DestinationWorkers workers);
 
   // "category=%@ type=%@ %@"
@@ -59,10 +74,12 @@ class TARN_CAPABILITY TarnReportingSessionMessage {
 
   // What records are sorted by: the time stamp, 0 when it is missing or no number.
   double sortingTime() const noexcept;
-  // Sorts in place and stably by epoch time; records without a time stamp count as 0.
+  // Sorts in place and stably by epoch time; records without a time stamp count as 0. One look when they are in order
+  // already, which is the rule.
   static void sortMessages(TarnReportingSessionMessages& messages);
 
-  // The record's own guard (BasicLockable), for changes to a record that a worker may still hold.
+  // The record's own guard (BasicLockable), for changes to a record that a worker may still hold. A flag and not a
+  // mutex, since there may be millions of records. It isn't recursive.
   void lock() const noexcept TARN_ACQUIRE();
   void unlock() const noexcept TARN_RELEASE();
 
@@ -76,6 +93,7 @@ class TARN_CAPABILITY TarnReportingSessionMessage {
   mutable std::atomic_flag guard_;
 };
 
+// Part of what bounds a log's memory; costOf() of the log's memory counts on it.
 static_assert(sizeof(TarnReportingSessionMessage) == 24);
 
 }  // namespace tarn

@@ -1,8 +1,6 @@
 #include "session/TarnReportingSessionMessageList.h"
 
 #include <algorithm>
-#include <queue>
-#include <tuple>
 
 #include "service/vocabulary/ProcessState.h"
 #include "service/vocabulary/TarnReportingLog.h"
@@ -12,9 +10,6 @@ namespace tarn {
 namespace {
 
 constexpr TarnReportingLogger kLog{TarnReportingSessionCategory, "TarnReportingSessionMessageList"};
-
-// Of a sort beyond the memory: what is sorted at once.
-constexpr std::size_t kChunksOfRun = 64;
 
 }  // namespace
 
@@ -49,9 +44,7 @@ void TarnReportingSessionMessageList::takeFrom(TarnReportingSessionMessageList& 
   overflowed_ = std::exchange(other.overflowed_, 0);
   parts_.swap(other.parts_);
   opened_.swap(other.opened_);
-  changes_ = other.changes_;
   if (memory_) {
-    memory_->place(other);
     memory_->place(*this);
   }
 }
@@ -71,11 +64,14 @@ void TarnReportingSessionMessageList::append(Record record) {
     memory_ = ProcessState::of<TarnReportingSessionLogMemory>();
   }
   const std::size_t cost = memory_->costOf(*record);
+  if (!recent_) [[unlikely]] {
+    recent_ = std::make_unique<TarnReportingSessionMessages>();
+  }
   // Whatever needs memory first: the record is in the list, and counted, or it isn't.
   if (chunks_.size() == chunks_.capacity()) {
     chunks_.reserve(2 * chunks_.size() + 1);
   }
-  recent_.push_back(std::move(record));
+  recent_->push_back(std::move(record));
   memory_->add(*this, cost);
   ++openChunk_.records;
   openChunk_.bytes += cost;
@@ -86,11 +82,13 @@ void TarnReportingSessionMessageList::append(Record record) {
   memory_->relieve(*this);
 }
 
+const TarnReportingSessionMessages& TarnReportingSessionMessageList::recent() const {
+  static const TarnReportingSessionMessages kEmpty;
+  return recent_ ? *recent_ : kEmpty;
+}
+
 void TarnReportingSessionMessageList::clear() {
-  // Not by a new one in its place: a deque allocates when it is made, and an end must not fail. What the records took
-  // goes back when there is the memory for a small one.
-  recent_.clear();
-  recent_.shrink_to_fit();
+  recent_.reset();
   chunks_ = {};
   firstChunk_ = 0;
   openChunk_ = {};
@@ -124,9 +122,6 @@ std::vector<std::shared_ptr<const TarnReportingSessionMessagePage>> TarnReportin
 }
 
 std::size_t TarnReportingSessionMessageList::partOf(std::size_t index) const noexcept {
-  for (const Opened& opened : opened_) {
-    if (opened.part != kNone && index - opened.first < opened.records.size()) return opened.part;
-  }
   const auto behind = std::upper_bound(parts_.begin(), parts_.end(), index,
                                        [](std::size_t place, const Part& part) { return place < part.first; });
   return static_cast<std::size_t>(behind - parts_.begin()) - 1;
@@ -172,31 +167,26 @@ void TarnReportingSessionMessageList::closePart(Opened& opened) const {
 void TarnReportingSessionMessageList::noteChange(std::size_t index) const {
   ++changes_;
   for (Opened& opened : opened_) {
-    if (opened.part != kNone && index - opened.first < opened.records.size()) {
+    if (index - opened.first < opened.records.size()) {
       opened.isChanged = true;
     }
   }
 }
 
 bool TarnReportingSessionMessageList::moveOldest() {
-  if (pins_ > 0 || recent_.empty()) return false;
+  if (pins_ > 0 || !recent_ || recent_->empty()) return false;
   const Chunk chunk = firstChunk_ < chunks_.size() ? chunks_[firstChunk_] : openChunk_;
-  const auto end = recent_.begin() + static_cast<std::ptrdiff_t>(chunk.records);
+  const auto end = recent_->begin() + static_cast<std::ptrdiff_t>(chunk.records);
   Page::Maker maker(chunk.bytes);
-  std::for_each(recent_.begin(), end, [&](const Record& record) { maker.add(*record); });
+  std::for_each(recent_->begin(), end, [&](const Record& record) { maker.add(*record); });
   auto page = maker.finish(*memory_->store_, memory_->pageCounts_);
   if (page.failed()) {
     memory_->toldFailure(*page.error);
     return false;
   }
   memory_->toldSuccess();
-  parts_.push_back({std::move(page.value), overflowed_});
-  if (overflowed_ == 0) {
-    ++memory_->overflowing_;
-    tellOverflow();
-  }
-  overflowed_ += chunk.records;
-  recent_.erase(recent_.begin(), end);
+  addPart(std::move(page.value));
+  recent_->erase(recent_->begin(), end);
   if (firstChunk_ == chunks_.size()) {
     openChunk_ = {};
   } else if (++firstChunk_ == chunks_.size()) {
@@ -207,9 +197,19 @@ bool TarnReportingSessionMessageList::moveOldest() {
   return true;
 }
 
-void TarnReportingSessionMessageList::moveAll() {
-  while (memory_ && memory_->mayTry() && moveOldest()) {
+bool TarnReportingSessionMessageList::moveAll() {
+  while (memory_->mayTry() && moveOldest()) {
   }
+  return size() == overflowed_;
+}
+
+void TarnReportingSessionMessageList::addPart(std::shared_ptr<const Page> page) {
+  parts_.push_back({std::move(page), overflowed_});
+  if (parts_.size() == 1) {
+    ++memory_->overflowing_;
+    tellOverflow();
+  }
+  overflowed_ += parts_.back().page->size();
 }
 
 void TarnReportingSessionMessageList::tellOverflow() {
@@ -218,108 +218,6 @@ void TarnReportingSessionMessageList::tellOverflow() {
        "the log has no more room in memory, its oldest messages wait on disk until the session stops. "
        "reporterID=%lli messages=%lu bytes=%lu",
        *reporterID_, size(), bytes_);
-}
-
-bool TarnReportingSessionMessageList::sort() {
-  if (parts_.empty()) {
-    TarnReportingSessionMessage::sortMessages(recent_);
-    return true;
-  }
-  if (isSorted()) return false;
-  std::vector<TarnReportingSessionMessageList> runs = sortedRuns();
-  merge(runs);
-  return true;
-}
-
-bool TarnReportingSessionMessageList::isSorted() const {
-  double last = parts_.front().page->firstTime();
-  for (const Part& part : parts_) {
-    if (part.isLost || !part.page->isSorted() || part.page->firstTime() < last) return false;
-    last = part.page->lastTime();
-  }
-  for (const Record& record : recent_) {
-    const double time = record->sortingTime();
-    if (time < last) return false;
-    last = time;
-  }
-  return true;
-}
-
-// Cuts the list into lists that are sorted, and leaves nothing in it.
-std::vector<TarnReportingSessionMessageList> TarnReportingSessionMessageList::sortedRuns() {
-  const std::size_t longest = std::max<std::size_t>(1, memory_->chunkBytes_ * kChunksOfRun);
-  std::vector<TarnReportingSessionMessageList> runs;
-  TarnReportingSessionMessages run;
-  std::size_t bytes = 0;
-  const auto finishRun = [&] {
-    TarnReportingSessionMessage::sortMessages(run);
-    TarnReportingSessionMessageList& made = runs.emplace_back();
-    for (Record& record : run) {
-      made.append(std::move(record));
-    }
-    made.moveAll();
-    run.clear();
-    bytes = 0;
-  };
-  const auto take = [&](const Record& record) {
-    bytes += memory_->costOf(*record);
-    run.push_back(record);
-    if (bytes >= longest) {
-      finishRun();
-    }
-  };
-  moveAll();
-  ++pins_;  // appending to the runs must not move what is gone through
-  for (std::size_t part = 0; part < parts_.size(); ++part) {
-    const std::vector<Record> records = open(part).records;
-    dropPart(part);
-    std::for_each(records.begin(), records.end(), take);
-  }
-  std::for_each(recent_.begin(), recent_.end(), take);
-  --pins_;
-  if (!run.empty()) {
-    finishRun();
-  }
-  return runs;
-}
-
-// Gives back what a part takes in the store; nothing of it is looked at again.
-void TarnReportingSessionMessageList::dropPart(std::size_t part) {
-  for (Opened& opened : opened_) {
-    if (opened.part == part) {
-      opened = {};
-    }
-  }
-  parts_[part].page.reset();
-}
-
-// Merges the runs into this list, the earlier run first where times are equal.
-void TarnReportingSessionMessageList::merge(std::vector<TarnReportingSessionMessageList>& runs) {
-  const bool wasTold = isTold_;
-  clear();
-  isTold_ = wasTold;
-  // The time of a run's next record, the run, and the record's place.
-  using Next = std::tuple<double, std::size_t, std::size_t>;
-  std::priority_queue<Next, std::vector<Next>, std::greater<>> queue;
-  const auto enqueue = [&](std::size_t run, std::size_t index) {
-    TarnReportingSessionMessageList& from = runs[run];
-    while (index < from.size()) {
-      if (const Record record = from[index]) {
-        queue.emplace(record->sortingTime(), run, index);
-        return;
-      }
-      ++index;
-    }
-  };
-  for (std::size_t run = 0; run < runs.size(); ++run) {
-    enqueue(run, 0);
-  }
-  while (!queue.empty()) {
-    const auto [time, run, index] = queue.top();
-    queue.pop();
-    append(runs[run][index]);
-    enqueue(run, index + 1);
-  }
 }
 
 }  // namespace tarn

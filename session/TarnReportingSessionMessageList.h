@@ -29,41 +29,55 @@
 
 namespace tarn {
 
+// Movable, so that a sort can hold runs. A list that is moved from is empty.
 class TarnReportingSessionMessageList {
  public:
   using Record = std::shared_ptr<TarnReportingSessionMessage>;
   using Page = TarnReportingSessionMessagePage;
   class Iterator;
 
+  // A list of a walk's own, which tells nobody when it overflows.
   TarnReportingSessionMessageList() = default;
-  // The log of a session.
+  // The log of a session. Its first overflow since it was empty logs a line with this ID, the messages and the bytes.
   explicit TarnReportingSessionMessageList(std::int64_t reporterID) : reporterID_(reporterID) {}
+  // No loop goes on over either.
   TarnReportingSessionMessageList(TarnReportingSessionMessageList&& other) noexcept;
   TarnReportingSessionMessageList& operator=(TarnReportingSessionMessageList&& other) noexcept;
   TarnReportingSessionMessageList(const TarnReportingSessionMessageList&) = delete;
   TarnReportingSessionMessageList& operator=(const TarnReportingSessionMessageList&) = delete;
   ~TarnReportingSessionMessageList();
 
-  // Where the list's memory is counted too from now on; null: nowhere.
+  // Where the list's memory is counted too from now on; null: nowhere. What the list holds now moves from the old
+  // account to the new one.
   void setAccount(std::shared_ptr<TarnReportingSessionLogAccount> account);
 
+  // Then moves the oldest messages of this list or of the largest one to the store, when a bound is exceeded. A store
+  // that fails loses nothing: the record is in the list in any case. Without the memory for it nothing has changed.
   void append(Record record);
   // Sorts by time stamp (TarnReportingSessionMessage::sortMessages); false when nothing had to be moved for sure. What
-  // couldn't be read back is gone then.
+  // couldn't be read back is gone then. In memory alone it is one pass when the list is in order, which is the rule. So
+  // it is with pages that tell by their times that they are in order: none of them is read. Else it cuts the list into
+  // sorted runs of 64 chunks and merges them, an earlier run first where times are equal, so that it stays stable.
   bool sort();
+  // Gives back the memory and what it takes in the store, and needs none. No loop goes on over the list.
   void clear();
 
-  std::size_t size() const noexcept { return overflowed_ + recent_.size(); }
+  // Records of pages that can't be read back count until a sort or clear().
+  std::size_t size() const noexcept { return overflowed_ + (recent_ ? recent_->size() : 0); }
   bool empty() const noexcept { return size() == 0; }
-  // The record; null for one that can't be read back.
+  // The record; null for one that can't be read back. Below overflowed() it may read a page: in order that costs a read
+  // a page, at random one a record.
   Record operator[](std::size_t index) const;
   Record at(std::size_t index) const { return (*this)[index]; }
+  // Of a list that isn't empty.
   Record front() const { return (*this)[0]; }
   Record back() const { return (*this)[size() - 1]; }
+  // Only one pass: an iterator is moved, not copied, and nothing of the list is moved to the store while it lives.
   Iterator begin() const;
   std::default_sentinel_t end() const noexcept { return {}; }
 
-  // Lets `apply(record)` change a record in place.
+  // Lets `apply(record)` change a record in place. Nothing happens when the record can't be read back. The page is
+  // written anew when it is left; when there is no room for it, it stays in memory.
   template <class Apply>
   void change(std::size_t index, Apply apply) const {
     const Record record = (*this)[index];
@@ -73,15 +87,20 @@ class TarnReportingSessionMessageList {
       noteChange(index);
     }
   }
-  // How often records of pages were changed in place.
+  // Calls take(index, record) from the last record to the first until it returns false. Pages of which wants(kind) is
+  // true for none of the kinds are passed over.
+  template <class Wants, class Take>
+  void goBack(const Wants& wants, Take take) const;
+  // How often records of pages were changed in place. Who keeps a record that was read back looks here whether it may
+  // be stale.
   std::uint64_t changes() const noexcept { return changes_; }
 
   // The first so many records lie in pages.
   std::size_t overflowed() const noexcept { return overflowed_; }
-  // The pages as they are now, without those that couldn't be read back.
+  // The pages as they are now, without those that couldn't be read back; changed ones are written first. Threads: any.
   std::vector<std::shared_ptr<const Page>> pages() const;
   // The records behind them.
-  const TarnReportingSessionMessages& recent() const noexcept { return recent_; }
+  const TarnReportingSessionMessages& recent() const;
 
  private:
   friend class TarnReportingSessionLogMemory;
@@ -104,25 +123,37 @@ class TarnReportingSessionMessageList {
     std::size_t records = 0;
     std::size_t bytes = 0;
   };
+  struct Run;
   static constexpr std::size_t kNone = static_cast<std::size_t>(-1);
 
   // The record; the reference holds until the second other page is read. Null for one that can't be read back.
   const Record& look(std::size_t index) const;
+  // The part of a record below overflowed().
   std::size_t partOf(std::size_t index) const noexcept;
+  // Reads the part's page unless it is one of the two that are open; an empty one when that is lost.
   const Opened& open(std::size_t part) const;
+  // Writes a changed page anew.
   void closePart(Opened& opened) const;
+  // Marks the open page of this record as changed.
   void noteChange(std::size_t index) const;
 
   // Moves the oldest records in memory to the store; false when that is not possible now.
   bool moveOldest();
-  void moveAll();
+  // Moves as much as the store takes; whether all records are there then.
+  bool moveAll();
+  // Puts a page behind the others. Nothing is in memory then.
+  void addPart(std::shared_ptr<const Page> page);
+  // The line of the first overflow.
   void tellOverflow();
-  void dropPart(std::size_t part);
+  // By the pages' times and the records in memory; reads nothing.
   bool isSorted() const;
-  std::vector<TarnReportingSessionMessageList> sortedRuns();
-  void merge(std::vector<TarnReportingSessionMessageList>& runs);
+  // Sorts what lies in pages and in memory; two pages of each run are in memory at a time.
+  void sortPages();
+  std::vector<Run> sortedRuns(std::vector<std::shared_ptr<const Page>> pages) const;
+  void merge(std::vector<Run>& runs);
   void takeFrom(TarnReportingSessionMessageList& other) noexcept;
 
+  // Nothing for lists of walks and sorts.
   std::optional<std::int64_t> reporterID_;  // of a session's log
   std::shared_ptr<TarnReportingSessionLogAccount> account_;
   std::shared_ptr<TarnReportingSessionLogMemory> memory_;  // from the first record on
@@ -130,12 +161,15 @@ class TarnReportingSessionMessageList {
   mutable int pins_ = 0;  // loops that go on; nothing is moved meanwhile
   bool isTold_ = false;
 
-  TarnReportingSessionMessages recent_;
+  // Made with the first: most sessions of a client that has thousands never get a message.
+  std::unique_ptr<TarnReportingSessionMessages> recent_;
   std::size_t bytes_ = 0;
+  // What is moved together next; `firstChunk_` is the oldest of them that is still in memory.
   std::vector<Chunk> chunks_;  // of recent_, those that are complete
   std::size_t firstChunk_ = 0;
   Chunk openChunk_;
 
+  // The parts' records, the parts, and the two that are open: a walk that compares neighbours needs two.
   std::size_t overflowed_ = 0;
   mutable std::vector<Part> parts_;
   mutable std::array<Opened, 2> opened_;  // the one read last comes first
@@ -145,58 +179,60 @@ class TarnReportingSessionMessageList {
 // Goes through the records that can be read. What it shows holds until it goes on to the page after the next.
 class TarnReportingSessionMessageList::Iterator {
  public:
-  using value_type = Record;
-  using reference = const Record&;
-  using difference_type = std::ptrdiff_t;
-  using iterator_concept = std::input_iterator_tag;
-
-  Iterator(Iterator&& other) noexcept : list_(std::exchange(other.list_, nullptr)), index_(other.index_) {}
-  Iterator& operator=(Iterator&& other) noexcept {
-    std::swap(list_, other.list_);
-    std::swap(index_, other.index_);
-    return *this;
-  }
   Iterator(const Iterator&) = delete;
   Iterator& operator=(const Iterator&) = delete;
-  ~Iterator() {
-    if (list_ != nullptr) {
-      --list_->pins_;
-    }
-  }
+  ~Iterator() { --list_.pins_; }
 
-  reference operator*() const { return list_->look(index_); }
-  const Record* operator->() const { return &list_->look(index_); }
+  // Records that can't be read back are skipped on the way, so this one is there.
+  const Record& operator*() const { return list_.look(index_); }
+  const Record* operator->() const { return &list_.look(index_); }
   Iterator& operator++() {
     ++index_;
     skipLost();
     return *this;
   }
-  void operator++(int) { ++*this; }
-  friend bool operator==(const Iterator& at, std::default_sentinel_t) { return at.index_ >= at.list_->size(); }
+  friend bool operator==(const Iterator& at, std::default_sentinel_t) { return at.index_ >= at.list_.size(); }
 
+  // The record's place in the list.
   std::size_t index() const noexcept { return index_; }
   // Whether the record is the first of its page, or the first behind the pages: what was shown of the page before goes.
   bool beginsPage() const noexcept {
-    if (index_ > list_->overflowed_ || list_->overflowed_ == 0) return false;
-    return index_ == list_->overflowed_ || list_->parts_[list_->partOf(index_)].first == index_;
+    return index_ <= list_.overflowed_ &&
+           (index_ == list_.overflowed_ || list_.parts_[list_.partOf(index_)].first == index_);
   }
 
  private:
   friend class TarnReportingSessionMessageList;
-  explicit Iterator(const TarnReportingSessionMessageList& list) : list_(&list) {
-    ++list_->pins_;
-    skipLost();
+  explicit Iterator(const TarnReportingSessionMessageList& list) : list_(list) {
+    skipLost();  // may throw, and then nobody would take the pin back
+    ++list_.pins_;
   }
+  // Goes past the pages that can't be read back.
   void skipLost() {
-    while (index_ < list_->overflowed_ && !list_->look(index_)) {
-      const std::size_t part = list_->partOf(index_);
-      index_ = list_->parts_[part].first + list_->parts_[part].page->size();
+    while (index_ < list_.overflowed_) {
+      const std::size_t part = list_.partOf(index_);
+      if (!list_.open(part).records.empty()) break;
+      index_ = list_.parts_[part].first + list_.parts_[part].page->size();
     }
   }
 
-  const TarnReportingSessionMessageList* list_;
+  const TarnReportingSessionMessageList& list_;
   std::size_t index_ = 0;
 };
+
+template <class Wants, class Take>
+void TarnReportingSessionMessageList::goBack(const Wants& wants, Take take) const {
+  for (std::size_t index = size(); index > overflowed_; --index) {
+    if (!take(index - 1, (*recent_)[index - 1 - overflowed_])) return;
+  }
+  for (std::size_t part = parts_.size(); part > 0; --part) {
+    if (!parts_[part - 1].page->contents().mayHave(wants)) continue;
+    const Opened& opened = open(part - 1);
+    for (std::size_t index = opened.records.size(); index > 0; --index) {
+      if (!take(opened.first + index - 1, opened.records[index - 1])) return;
+    }
+  }
+}
 
 inline TarnReportingSessionMessageList::Iterator TarnReportingSessionMessageList::begin() const {
   return Iterator(*this);
@@ -204,7 +240,7 @@ inline TarnReportingSessionMessageList::Iterator TarnReportingSessionMessageList
 
 inline const TarnReportingSessionMessageList::Record& TarnReportingSessionMessageList::look(std::size_t index) const {
   if (index >= overflowed_) [[likely]] {
-    return recent_[index - overflowed_];
+    return (*recent_)[index - overflowed_];
   }
   static const Record kLost;
   const Opened& opened = open(partOf(index));

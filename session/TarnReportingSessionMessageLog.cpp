@@ -1,20 +1,10 @@
 #include "session/TarnReportingSessionMessageLog.h"
 
-#include <utility>
-
 namespace tarn {
-
-namespace {
-
-std::uint64_t keyOf(AudioEventCategory category, AudioEventType type) {
-  return std::uint64_t{static_cast<std::uint32_t>(category)} << 16U | static_cast<std::uint16_t>(type);
-}
-
-}  // namespace
 
 void TarnReportingSessionMessageLog::append(Record record) {
   // The place first: what points to the record must not outlive one that found no room.
-  const auto [place, isNew] = newest_.try_emplace(keyOf(record->category(), record->type()));
+  const auto [place, isNew] = newest_.try_emplace(record->kind());
   const std::size_t index = messages_.size();
   const TarnReportingSessionMessage* const recent = record.get();
   try {
@@ -41,9 +31,19 @@ void TarnReportingSessionMessageLog::note(Newest& newest, std::size_t index,
 void TarnReportingSessionMessageLog::sort() {
   if (!messages_.sort()) return;
   forgetKept();
-  for (auto at = messages_.begin(); at != messages_.end(); ++at) {
-    note(newest_[keyOf((*at)->category(), (*at)->type())], at.index(), at->get());
+  for (auto& [kind, newest] : newest_) {
+    newest = {};
   }
+  std::size_t left = newest_.size();
+  const auto isMissing = [&](TarnReportingSessionMessage::Kind kind) { return newest_[kind].index == kNone; };
+  messages_.goBack(isMissing, [&](std::size_t index, const Record& record) {
+    if (isMissing(record->kind())) {
+      newest_[record->kind()] = {index, record.get(), nullptr};
+      --left;
+    }
+    return left > 0;
+  });
+  std::erase_if(newest_, [](const auto& entry) { return entry.second.index == kNone; });  // of pages that are lost
 }
 
 void TarnReportingSessionMessageLog::clear() {
@@ -55,7 +55,7 @@ void TarnReportingSessionMessageLog::clear() {
 
 const TarnReportingSessionMessage* TarnReportingSessionMessageLog::newest(AudioEventCategory category,
                                                                           AudioEventType type) const {
-  const auto found = newest_.find(keyOf(category, type));
+  const auto found = newest_.find(TarnReportingSessionMessage::kindOf(category, type));
   if (found == newest_.end()) return nullptr;
   Newest& newest = found->second;
   if (newest.index >= messages_.overflowed()) return newest.recent;
@@ -66,7 +66,7 @@ const TarnReportingSessionMessage* TarnReportingSessionMessageLog::newest(AudioE
   }
   if (newest.kept) return newest.kept.get();
   looked_ = messages_[newest.index];
-  if (kept_ < kMostKept && looked_) {
+  if (looked_ && kept_ < kMostKept) {
     newest.kept = looked_;
     ++kept_;
   }
@@ -74,10 +74,10 @@ const TarnReportingSessionMessage* TarnReportingSessionMessageLog::newest(AudioE
 }
 
 void TarnReportingSessionMessageLog::forgetKept() const {
-  if (std::exchange(kept_, 0) == 0) return;
   for (auto& [key, newest] : newest_) {
     newest.kept.reset();
   }
+  kept_ = 0;
 }
 
 }  // namespace tarn

@@ -3,7 +3,8 @@
 //
 // The rule is defined by a walk from the newest record to the oldest for one of the same category and type. The log
 // keeps the answer of that walk for every pair of category and type, so that a look-up costs the same in a long session
-// as in a short one. A sort changes what the walk would find: the answers are then computed again in one pass.
+// as in a short one. A sort changes what the walk would find: then it is walked again, over pages that have what is
+// looked for.
 //
 // A record that went to the overflow store is read back when it is looked up. Of a bounded number of kinds it is kept
 // then; a client that has thousands of kinds pays with a read for each of its messages, and not with memory.
@@ -24,34 +25,45 @@ class TarnReportingSessionMessageLog {
  public:
   using Record = TarnReportingSessionMessageList::Record;
 
+  // The ID is for lines about the overflow alone.
   explicit TarnReportingSessionMessageLog(std::int64_t reporterID) : messages_(reporterID) {}
 
   void setAccount(std::shared_ptr<TarnReportingSessionLogAccount> account) { messages_.setAccount(std::move(account)); }
+  // The record is the newest of its category and type from now on. Without the memory for it nothing has changed.
   void append(Record record);
-  // Sorts by time stamp (TarnReportingSessionMessage::sortMessages).
+  // Sorts by time stamp (TarnReportingSessionMessage::sortMessages). Without a pass over the look-up when nothing
+  // moved.
   void sort();
+  // The log is as new.
   void clear();
 
   // The record nearest to the end of the log, as it now stands, of this category and type; null when there is none. It
-  // holds until the next look-up.
+  // holds until the next look-up. One hash look-up; a read from the store when the record overflowed and isn't kept.
   const TarnReportingSessionMessage* newest(AudioEventCategory category, AudioEventType type) const;
 
+  // Who changes a record of it in place does so by the list's change().
   const TarnReportingSessionMessageList& messages() const noexcept { return messages_; }
+  // In records, the markers of start and stop included.
   std::size_t size() const noexcept { return messages_.size(); }
 
  private:
+  static constexpr std::size_t kNone = static_cast<std::size_t>(-1);
+  // Where the newest record of a kind is.
   struct Newest {
-    std::size_t index = 0;
+    std::size_t index = kNone;
     const TarnReportingSessionMessage* recent = nullptr;  // while the log itself has it in memory
     Record kept;                                          // else, when it was read back
   };
+  // Kinds whose overflowed record is kept in memory, at the cost of a record each.
   static constexpr std::size_t kMostKept = 256;
 
+  // Replaces what was the newest record of a kind, and lets go of its copy.
   void note(Newest& newest, std::size_t index, const TarnReportingSessionMessage* recent) noexcept;
+  // Lets go of all copies: a sort moved the records, or a producer changed one.
   void forgetKept() const;
 
   TarnReportingSessionMessageList messages_;
-  mutable std::unordered_map<std::uint64_t, Newest> newest_;
+  mutable std::unordered_map<TarnReportingSessionMessage::Kind, Newest> newest_;
   mutable std::size_t kept_ = 0;
   mutable std::uint64_t changesSeen_ = 0;  // of the records that are kept here
   mutable Record looked_;

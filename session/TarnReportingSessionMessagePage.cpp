@@ -1,11 +1,13 @@
 #include "session/TarnReportingSessionMessagePage.h"
 
 #include <algorithm>
+#include <array>
 #include <cstdint>
 #include <cstring>
 #include <string_view>
 #include <utility>
 
+#include "plist/Key.h"
 #include "service/vocabulary/TarnReportingLog.h"
 
 namespace tarn {
@@ -16,27 +18,21 @@ constexpr TarnReportingLogger kLog{TarnReportingSessionCategory, "TarnReportingS
 
 constexpr std::uint8_t kRedundant = 1;
 constexpr std::uint8_t kSessionStarted = 2;
+// Of a page; a client that has more of them within a few hundred messages doesn't make pages larger.
+constexpr std::size_t kMostKinds = 64;
 
-// Sees what a disk did to the bytes.
+// Sees what a disk did to the bytes. It is the same for as long as the process runs, as a page is.
 std::uint64_t checksum(std::string_view bytes) noexcept {
-  constexpr std::uint64_t kFactor = 0x9E3779B97F4A7C15U;
-  std::uint64_t sum = bytes.size();
-  for (std::size_t at = 0; at < bytes.size(); at += sizeof sum) {
-    std::uint64_t word = 0;
-    std::memcpy(&word, bytes.data() + at, std::min(sizeof word, bytes.size() - at));
-    sum = (sum ^ word) * kFactor;
-    sum ^= sum >> 29U;
-  }
-  return sum;
+  return plist::Key::hashOf(bytes);
 }
 
 bool readRecord(plist::PackedImageReader& reader,
                 const std::vector<TarnReportingSessionMessage::DestinationWorkers>& destinations,
                 TarnReportingSessionMessagePage::Record& record) {
-  AudioEventCategory category{};
-  AudioEventType type{};
-  std::uint8_t flags = 0;
-  std::uint32_t destination = 0;
+  AudioEventCategory category;
+  AudioEventType type;
+  std::uint8_t flags;
+  std::uint32_t destination;
   plist::Dictionary payload;
   const bool isWhole = reader.readNumber(category) && reader.readNumber(type) && reader.readNumber(flags) &&
                        reader.readNumber(destination) && destination <= destinations.size() && reader.read(payload);
@@ -54,16 +50,32 @@ bool readRecord(plist::PackedImageReader& reader,
 
 void TarnReportingSessionMessagePage::Maker::add(const TarnReportingSessionMessage& record) {
   const double time = record.sortingTime();
-  isSorted_ = isSorted_ && (size_ == 0 || lastTime_ <= time);
-  firstTime_ = size_ == 0 ? time : firstTime_;
+  if (contents_.records++ == 0) {
+    contents_.earliest = contents_.latest = time;
+  } else {
+    contents_.isSorted = contents_.isSorted && lastTime_ <= time;
+    contents_.earliest = std::min(contents_.earliest, time);
+    contents_.latest = std::max(contents_.latest, time);
+  }
   lastTime_ = time;
-  ++size_;
+  noteKind(record.kind());
   const int flags = (record.isRedundant() ? kRedundant : 0) | (record.isSessionStarted() ? kSessionStarted : 0);
   writer_.writeNumber(record.category());
   writer_.writeNumber(record.type());
   writer_.writeNumber(static_cast<std::uint8_t>(flags));
   writer_.writeNumber(static_cast<std::uint32_t>(numberOf(record.destinationWorkers())));
   writer_.write(record.message());
+}
+
+void TarnReportingSessionMessagePage::Maker::noteKind(TarnReportingSessionMessage::Kind kind) {
+  std::vector<TarnReportingSessionMessage::Kind>& kinds = contents_.kinds;
+  if (contents_.mayHave([kind](TarnReportingSessionMessage::Kind each) { return each == kind; })) return;
+  if (kinds.size() == kMostKinds) {
+    contents_.hasManyKinds = true;
+    kinds = {};
+    return;
+  }
+  kinds.push_back(kind);
 }
 
 // Messages go to few sets of workers, whose names are static texts: they needn't be written.
@@ -80,13 +92,11 @@ std::size_t TarnReportingSessionMessagePage::Maker::numberOf(
 
 Result<std::shared_ptr<const TarnReportingSessionMessagePage>> TarnReportingSessionMessagePage::Maker::finish(
     platform::OverflowStore& store, const std::shared_ptr<Counts>& counts) {
-  if (!std::exchange(isSealed_, true)) {
-    writer_.writeNumber(checksum(image_));
-  }
+  writer_.writeNumber(checksum(image_));
   Result<platform::OverflowStore::Place> written = store.write(image_);
   if (written.failed()) return {nullptr, std::move(written.error)};
   const std::size_t bytes = image_.size();
-  image_ = std::string();
+  std::string().swap(image_);  // an assignment would keep the room, and the page with it
   const auto page = makePage(counts);
   page->store_ = &store;
   page->place_ = written.value;
@@ -110,10 +120,7 @@ std::shared_ptr<TarnReportingSessionMessagePage> TarnReportingSessionMessagePage
   page->image_ = std::move(image_);
   counts->bytesInMemory += page->image_.size();
   page->destinations_ = std::move(destinations_);
-  page->size_ = size_;
-  page->firstTime_ = firstTime_;
-  page->lastTime_ = lastTime_;
-  page->isSorted_ = isSorted_;
+  page->contents_ = std::move(contents_);
   return page;
 }
 
@@ -130,8 +137,8 @@ std::vector<TarnReportingSessionMessagePage::Record> TarnReportingSessionMessage
     records = tryToRead();  // a fault may have been the moment's
   }
   if (records.failed()) {
-    counts_->recordsLost += size_;
-    kLog(LogLevel::Error, "%lu messages of a log can't be read back: %@", size_, records.error->text);
+    counts_->recordsLost += size();
+    kLog(LogLevel::Error, "%lu messages of a log can't be read back: %@", size(), records.error->text);
   }
   return std::move(records.value);
 }
@@ -143,15 +150,15 @@ Result<std::vector<TarnReportingSessionMessagePage::Record>> TarnReportingSessio
     if (stored.failed()) return {{}, std::move(stored.error)};
   }
   std::string_view image = store_ != nullptr ? std::string_view(stored.value) : std::string_view(image_);
-  std::uint64_t expected = 0;
-  if (image.size() < sizeof expected) return {{}, Error{0, "the page is cut"}};
+  std::uint64_t expected;
+  if (image.size() < sizeof expected) return {{}, Error{.text = "the page is cut"}};
   std::memcpy(&expected, image.data() + image.size() - sizeof expected, sizeof expected);
   image.remove_suffix(sizeof expected);
-  if (checksum(image) != expected) return {{}, Error{0, "the page is damaged"}};
+  if (checksum(image) != expected) return {{}, Error{.text = "the page is damaged"}};
   plist::PackedImageReader reader(image);
-  std::vector<Record> records(size_);
+  std::vector<Record> records(size());
   for (Record& record : records) {
-    if (!readRecord(reader, destinations_, record)) return {{}, Error{0, "the page is damaged"}};
+    if (!readRecord(reader, destinations_, record)) return {{}, Error{.text = "the page is damaged"}};
   }
   return {std::move(records), {}};
 }

@@ -19,17 +19,21 @@ namespace tarn {
 
 class TarnReportingSessionPreviousValues {
  public:
-  // The latest value per key wins.
+  // The latest value per key wins. A payload of a shape that was seen lately costs a reference count; one of a new
+  // shape, once 16 are kept, has the oldest of them merged key by key.
   void merge(const plist::Dictionary& payload);
+  // What the other one has wins, as if its messages had come last.
   void merge(const TarnReportingSessionPreviousValues& other);
 
-  // The latest value of the key, absent when it was never seen. Ends with the next merge.
+  // The latest value of the key, absent when it was never seen. Ends with the next merge. At most 17 look-ups.
   plist::ValueView get(const plist::Key& key) const noexcept;
+  // How many keys there are; for tests and for looking at a session.
   std::size_t size() const { return dictionary().size(); }
-  // All of it. The order of the keys has no meaning.
+  // All of it. The order of the keys has no meaning. Made anew by each call, in one pass; size() makes it too.
   plist::Dictionary dictionary() const;
 
  private:
+  // More shapes than a client usually takes turns with, and few enough to look through for a key.
   static constexpr std::size_t kRecentLimit = 16;
 
   std::vector<plist::Dictionary> recent_;  // oldest first, no two of the same key list

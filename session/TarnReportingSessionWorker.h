@@ -36,11 +36,12 @@ class TarnReportingSessionWorkerProtocol {
   TarnReportingSessionWorkerProtocol& operator=(const TarnReportingSessionWorkerProtocol&) = delete;
   virtual ~TarnReportingSessionWorkerProtocol() = default;
 
-  // The owning session; nothing while it is going away.
+  // The owning session; nothing while it is going away. A worker asked then has nobody to send to and does nothing.
   std::shared_ptr<TarnReportingSession> session() const noexcept { return session_.lock(); }
   void setSession(std::weak_ptr<TarnReportingSession> session) noexcept { session_ = std::move(session); }
   // Whether the worker runs; kept by the session. A worker whose back-end has a say in it keeps it itself.
   virtual bool started() const noexcept { return started_; }
+  // The session sets it to what start() says, and to false when it has stopped the worker.
   virtual void setStarted(bool started) noexcept { started_ = started; }
 
  private:
@@ -52,7 +53,9 @@ class TarnReportingSessionWorkerProtocol {
 class TarnReportingSessionWorkerConsumerProtocol {
  public:
   virtual ~TarnReportingSessionWorkerConsumerProtocol() = default;
-  // One message. All workers get the same record: copy it to keep or change it.
+  // One message. All workers get the same record: copy it to keep or change it. Called only while the worker runs, and
+  // not for messages that are redundant or addressed to others, but for what the class declares. It may send messages
+  // into the session, which come back to it before the call returns.
   virtual void handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) = 0;
 };
 

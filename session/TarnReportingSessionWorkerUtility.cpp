@@ -1,6 +1,7 @@
 #include "session/TarnReportingSessionWorkerUtility.h"
 
 #include <algorithm>
+#include <optional>
 #include <vector>
 
 #include "session/TarnReportingSessionKeys.h"
@@ -18,9 +19,11 @@ TarnReportingCombinedMessages TarnReportingSessionWorkerUtility::combineRapidMes
     double maximumPausetime) {
   TarnReportingCombinedMessages combined(messages);
   std::vector<bool> seen(keysToCombine.size());
-  bool hasHead = false;
-  std::size_t head = 0;
-  double headTime = 0;
+  struct Head {
+    std::size_t index;
+    double time;
+  };
+  std::optional<Head> head;
   for (auto at = messages.begin(); at != messages.end(); ++at) {
     const std::shared_ptr<TarnReportingSessionMessage>& message = *at;
     const plist::Dictionary& payload = message->message();
@@ -30,25 +33,21 @@ TarnReportingCombinedMessages TarnReportingSessionWorkerUtility::combineRapidMes
     const auto place = static_cast<std::size_t>(key - keysToCombine.begin());
     if (seen[place]) {
       seen.assign(seen.size(), false);
-      hasHead = false;
+      head.reset();
     }
     seen[place] = true;
     const plist::ValueView time = payload.get(keys::kTimestamp);
-    if (hasHead && time.asDouble() - headTime < maximumPausetime) {
+    if (!head) {
+      head = {at.index(), time.asDouble()};
+    } else if (time.asDouble() - head->time < maximumPausetime) {
       // Its own count: the page that it lies in may go when the head's is read.
       const plist::Dictionary merged = payload;
-      headTime = time.present() ? time.asDouble() : headTime;
-      messages.change(head, [&](TarnReportingSessionMessage& record) {
+      head->time = time.present() ? time.asDouble() : head->time;
+      messages.change(head->index, [&](TarnReportingSessionMessage& record) {
         const MutexLock guard(record);
         record.mutableMessage().merge(merged);
       });
       combined.setMerged(at.index());
-      continue;
-    }
-    if (!hasHead) {
-      hasHead = true;
-      head = at.index();
-      headTime = time.asDouble();
     }
   }
   return combined;

@@ -15,6 +15,7 @@ namespace tarn {
 // A list of messages without some of them, which were merged into others; the list outlives it.
 class TarnReportingCombinedMessages {
  public:
+  // All are left in at first. A bit a message.
   explicit TarnReportingCombinedMessages(const TarnReportingSessionMessageList& all) : all_(all), merged_(all.size()) {}
 
   const TarnReportingSessionMessageList& all() const noexcept { return all_; }

@@ -3,10 +3,12 @@
 #pragma once
 
 #include <cstddef>
+#include <functional>
 #include <map>
 #include <mutex>
 #include <string>
 #include <string_view>
+#include <utility>
 
 #include "platform/OverflowStore.h"
 
@@ -21,6 +23,13 @@ class FakeOverflowStore final : public platform::OverflowStore {
     if (isFull_) return {0, Error{28, "No space left on device"}};
     kept_.emplace(++last_, bytes);
     ++written_;
+    if (onWrite_) {
+      std::size_t sum = 0;
+      for (const auto& [place, block] : kept_) {
+        sum += block.size();
+      }
+      onWrite_(sum);
+    }
     return {last_, {}};
   }
   Result<std::string> read(Place place) override {
@@ -40,6 +49,8 @@ class FakeOverflowStore final : public platform::OverflowStore {
   void setBounds(std::size_t bytesOfSession, std::size_t bytesInAll) { bounds_ = {bytesOfSession, bytesInAll}; }
   void setFull(bool isFull) { isFull_ = isFull; }
   void setFailsReads(bool fails) { failsReads_ = fails; }
+  // Called for each block that is written with the bytes that are kept now.
+  void setOnWrite(std::function<void(std::size_t)> onWrite) { onWrite_ = std::move(onWrite); }
   // Changes a byte in the middle of each block.
   void damage() {
     const std::lock_guard guard(mutex_);
@@ -75,6 +86,7 @@ class FakeOverflowStore final : public platform::OverflowStore {
   std::size_t read_ = 0;
   bool isFull_ = false;
   bool failsReads_ = false;
+  std::function<void(std::size_t)> onWrite_;
 };
 
 }  // namespace tarn::testing

@@ -9,7 +9,7 @@
 #include <vector>
 
 #include "platform/Signposts.h"
-#include "testing/OwnMemory.h"
+#include "testing/backends/OwnMemory.h"
 
 namespace tarn::testing {
 

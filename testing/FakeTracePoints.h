@@ -8,7 +8,7 @@
 #include <vector>
 
 #include "platform/TracePoints.h"
-#include "testing/OwnMemory.h"
+#include "testing/backends/OwnMemory.h"
 
 namespace tarn::testing {
 

@@ -13,7 +13,7 @@
 #include <utility>
 
 #include "testing/ManualClock.h"
-#include "testing/OwnMemory.h"
+#include "testing/backends/OwnMemory.h"
 
 namespace tarn::testing {
 
@@ -231,6 +231,7 @@ void ManualWorkQueue::help(std::chrono::nanoseconds) {
 
 bool ManualWorkQueue::spend(std::size_t cost) {
   spent_ += cost;
+  spentInAll_ += cost;
   return turn_ != 0 && spent_ >= turn_;
 }
 

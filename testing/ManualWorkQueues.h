@@ -55,6 +55,8 @@ class ManualWorkQueue final : public platform::SuspendableQueue {
 
   // Observations.
   const std::string& name() const noexcept { return name_; }
+  // What its work has spent in all.
+  std::size_t spent() const noexcept { return spentInAll_; }
   platform::QualityOfService quality() const noexcept { return quality_; }
   // Pieces of work of this queue whose moment has not come; a suspension is one.
   std::size_t delayed() const;
@@ -66,6 +68,7 @@ class ManualWorkQueue final : public platform::SuspendableQueue {
   const platform::QualityOfService quality_;
   std::size_t turn_ = 0;
   std::size_t spent_ = 0;  // since work of it last gave way
+  std::size_t spentInAll_ = 0;
 };
 
 class ManualWorkQueues final : public platform::WorkQueues {

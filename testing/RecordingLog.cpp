@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <utility>
 
-#include "testing/OwnMemory.h"
+#include "testing/backends/OwnMemory.h"
 
 namespace tarn::testing {
 

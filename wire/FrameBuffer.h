@@ -20,6 +20,8 @@
 
 namespace tarn::wire {
 
+// A frame that is announced too long is found out by its first four bytes; content isn't looked at. Receiving into it
+// costs no copy but that of what is left of a frame when the space runs out. Throws std::bad_alloc in space() alone.
 class FrameBuffer {
  public:
   // The free space that is offered when no large frame is under way.
@@ -43,7 +45,7 @@ class FrameBuffer {
   // The next whole frame, its length left out. Valid until space() or release() is called.
   Next next(std::span<const std::byte>& frame) noexcept;
 
-  // Received bytes that no frame was made of yet.
+  // Received bytes that no frame was made of yet: part of one, or frames that nobody has asked for.
   std::size_t pendingBytes() const noexcept { return end_ - begin_; }
   // The length that the unfinished or refused frame announces; 0 while that is not known.
   std::size_t announcedBytes() const noexcept;
@@ -51,10 +53,13 @@ class FrameBuffer {
   void release() noexcept;
 
  private:
+  // Moves what is pending to the front of new memory of this size.
   void resize(std::size_t capacity);
 
+  // Above this a frame is Oversize.
   std::size_t maxFrameBytes_;
   std::unique_ptr<std::byte[]> bytes_;
+  // Of bytes_; what is pending lies from begin_ to end_.
   std::size_t capacity_ = 0;
   std::size_t begin_ = 0;
   std::size_t end_ = 0;

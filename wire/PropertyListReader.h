@@ -22,31 +22,56 @@
 
 namespace tarn::wire {
 
-// The value of a 16-bit float.
+// The value of a 16-bit float, exactly: every one has a 32-bit float of the same value. Infinities and not-a-numbers
+// stay what they are.
 float floatFromHalf(std::uint16_t half) noexcept;
 
+// Reads from a reader that it shares with its owner, at whose place it goes on, and stops at the first trouble. Texts,
+// data and keys are handed over as views into the frame, after a look at their UTF-8. It allocates nothing by itself
+// and takes no step for what a head only promises: each promised item costs a byte of the frame at least. Threads: one
+// at a time.
+//
+// What it takes, and what it makes of it:
+//
+//   integers, -2^63 to 2^64 - 1            Signed, or Unsigned where Signed can't hold it
+//   floats of 16, 32 and 64 bits           Float, Float and Double
+//   true, false                            Bool
+//   text of UTF-8, its length told         Text
+//   bytes, their length told               Data
+//   tag 1 over an integer or a float       Date
+//   array, its length told                 Array
+//   map with text keys, its length told    Dictionary
+//
+// Everything else is trouble: null, undefined, other simple values, other tags, keys that are no texts.
 template <class Sink>
 class PropertyListReader {
  public:
   PropertyListReader(CborReader& in, Sink& sink) noexcept : in_(in), sink_(sink) {}
 
-  // What was wrong when a read returned false; a static text.
+  // What was wrong when a read returned false; a static text, or null when the frame ended early or wasn't CBOR, which
+  // makes it unreadable altogether.
   const char* trouble() const noexcept { return trouble_; }
 
-  // The entries or items of a container whose head was read. `depth` is its level, 1 for an outermost one.
+  // The entries or items of a container whose head was read, up to its end; the sink gets each of them. `depth` is its
+  // level, 1 for an outermost one. False at the first trouble; what the sink got until then is the caller's to drop.
   bool readEntries(const CborHead& head, std::size_t depth);
   bool readItems(const CborHead& head, std::size_t depth);
-  // The value whose head was read; not for containers.
+  // The value whose head was read; not for containers. Texts and data look into the frame.
   bool readScalar(const CborHead& head, plist::ValueView& value);
 
  private:
+  // The text before an entry's value.
   bool readKey(std::string_view& key);
+  // A container inside another one, from its begin() to its end in the sink; `key` is null inside an array.
   bool readContainer(const CborHead& head, const std::string_view* key, std::size_t depth);
+  // One kind of head each, by its major type.
   bool readNegative(const CborHead& head, plist::ValueView& value);
   bool readString(const CborHead& head, plist::ValueView& value);
   bool readSimple(const CborHead& head, plist::ValueView& value);
   bool readDate(const CborHead& head, plist::ValueView& value);
+  // Whether a container of this head may stand at this level: its length is told, and it isn't too deep.
   bool mayHold(const CborHead& head, std::size_t depth);
+  // Keeps what is wrong, for the caller to return.
   bool fail(const char* trouble) noexcept {
     trouble_ = trouble;
     return false;
@@ -60,12 +85,15 @@ class PropertyListReader {
   const char* trouble_ = nullptr;
 };
 
+// Lengths that are left open are refused, so that a container's values are counted before the first is read.
 template <class Sink>
 bool PropertyListReader<Sink>::mayHold(const CborHead& head, std::size_t depth) {
   if (head.open()) return fail("a container of indefinite length");
   return depth <= kMaxNesting || fail("nested too deep");
 }
 
+// Entry after entry: a key, then a value. A container among them goes through readContainer(), which gives it to the
+// sink under its key when it has ended. A count of 2^64 - 1 ends with the frame, at the first key that isn't there.
 template <class Sink>
 bool PropertyListReader<Sink>::readEntries(const CborHead& head, std::size_t depth) {
   if (!mayHold(head, depth)) return false;
@@ -84,6 +112,7 @@ bool PropertyListReader<Sink>::readEntries(const CborHead& head, std::size_t dep
   return true;
 }
 
+// The same without keys.
 template <class Sink>
 bool PropertyListReader<Sink>::readItems(const CborHead& head, std::size_t depth) {
   if (!mayHold(head, depth)) return false;
@@ -101,6 +130,9 @@ bool PropertyListReader<Sink>::readItems(const CborHead& head, std::size_t depth
   return true;
 }
 
+// Opens the container in the sink, fills it and ends it there. This is where the reader calls itself: once a level, and
+// mayHold() ends that at kMaxNesting. A key that stands twice shows at the end, when the sink looks for the list of
+// keys.
 template <class Sink>
 bool PropertyListReader<Sink>::readContainer(const CborHead& head, const std::string_view* key, std::size_t depth) {
   sink_.begin();
@@ -108,6 +140,7 @@ bool PropertyListReader<Sink>::readContainer(const CborHead& head, const std::st
   return readEntries(head, depth) && (sink_.endDictionary(key) || fail("a key given twice"));
 }
 
+// Any text is a key, an empty one included; that it stands there once is the sink's to find out.
 template <class Sink>
 bool PropertyListReader<Sink>::readKey(std::string_view& key) {
   CborHead head;
@@ -121,6 +154,8 @@ bool PropertyListReader<Sink>::readKey(std::string_view& key) {
   return in_.readBytes(head.argument, key) && (isUtf8(key) || fail("a key that is not UTF-8"));
 }
 
+// By major type. Containers have operations of their own, so here one is trouble: an error's text that is an array, for
+// example.
 template <class Sink>
 bool PropertyListReader<Sink>::readScalar(const CborHead& head, plist::ValueView& value) {
   switch (head.major) {
@@ -144,6 +179,7 @@ bool PropertyListReader<Sink>::readScalar(const CborHead& head, plist::ValueView
   }
 }
 
+// The value is -1 - argument. Of those CBOR can say down to -2^64; a property list holds them down to -2^63.
 template <class Sink>
 bool PropertyListReader<Sink>::readNegative(const CborHead& head, plist::ValueView& value) {
   if (head.argument > static_cast<std::uint64_t>(std::numeric_limits<std::int64_t>::max())) {
@@ -153,6 +189,7 @@ bool PropertyListReader<Sink>::readNegative(const CborHead& head, plist::ValueVi
   return true;
 }
 
+// Text and data differ in the look at the text's characters alone, which takes eight at a time while they are ASCII.
 template <class Sink>
 bool PropertyListReader<Sink>::readString(const CborHead& head, plist::ValueView& value) {
   if (head.open()) [[unlikely]] {
@@ -168,6 +205,8 @@ bool PropertyListReader<Sink>::readString(const CborHead& head, plist::ValueView
   return isUtf8(bytes) || fail("a text that is not UTF-8");
 }
 
+// By information: 20 and 21 are the bools, 25 to 27 the floats, whose bits are the argument. A float of any value is
+// taken, those that are no numbers included.
 template <class Sink>
 bool PropertyListReader<Sink>::readSimple(const CborHead& head, plist::ValueView& value) {
   switch (head.info) {
@@ -193,6 +232,7 @@ bool PropertyListReader<Sink>::readSimple(const CborHead& head, plist::ValueView
   }
 }
 
+// Seconds since 1970 UTC, in any kind of number; a date holds them as a double, so an integer beyond 2^53 loses digits.
 template <class Sink>
 bool PropertyListReader<Sink>::readDate(const CborHead& head, plist::ValueView& value) {
   if (head.argument != 1) return fail("a tag other than that of a date");

@@ -8,6 +8,11 @@
 //   unknown operation; wrong count, kind or range of an argument; something
 //   inside a dictionary argument that is no property list                    Refused: answer with the error, go on
 //
+//   [1, 99]                    Refused, UnknownOperation: "unknown operation"
+//   [1, 1]                     Refused, BadArguments: "createReportingSession: wrong number of arguments"
+//   [1, 4, {"a": null}, 42]    Refused, NotPropertyList: "setConfiguration: not a property list: a null"
+//   [-1, 1, 42]                Unreadable: "no readable id"
+//
 // Lengths that are left open (indefinite) make a frame no less whole; inside a dictionary argument they are refused.
 // Nesting deeper than a property list may have costs no stack, and little more memory than the frame itself.
 //
@@ -19,6 +24,7 @@
 #include <cstdint>
 #include <span>
 #include <string>
+#include <string_view>
 
 #include "plist/PackedBuilder.h"
 #include "wire/Request.h"
@@ -31,8 +37,14 @@ enum class DecodeVerdict {
   Unreadable,  // the refusal's text says why
 };
 
+// The text of the error OutOfMemory: short enough for a string to hold it in itself.
+inline constexpr std::string_view kOutOfMemory = "out of memory";
+
 struct Refusal {
+  // What the client is told.
   ErrorCode code = ErrorCode::BadArguments;
+  // For people: the operation's name, and what was expected in the place; or what makes the frame unreadable. English,
+  // and never the client's own bytes, so it may go into a log as it is.
   std::string text;
 };
 
@@ -47,6 +59,7 @@ class RequestDecoder {
   DecodeVerdict decode(std::span<const std::byte> frame, DecodedRequest& request, Refusal& refusal);
 
  private:
+  // Scratch space and lists for decode(); nothing of an earlier frame.
   plist::PackedBuilder builder_;
   plist::KeyListCache keyLists_;
 };

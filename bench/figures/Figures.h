@@ -14,6 +14,7 @@ void measureRecorded(const Settings& settings, Table& table);
 void measureFleet(const Settings& settings, Table& table);
 void measureVisible(const Settings& settings, Table& table);
 void measurePost(const Settings& settings, Table& table);
+void measureIdle(const Settings& settings, Table& table);
 void measureDecoding(const Settings& settings, Table& table);
 void measureMemory(const Settings& settings, Table& table);
 void measureEquality(const Settings& settings, Table& table);

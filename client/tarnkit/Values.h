@@ -10,9 +10,13 @@
 
 namespace tarn::client {
 
+// A copy of it in the packed form, made in one allocation a container. An empty dictionary where a key is given twice,
+// which a tarnkit::Dictionary can't have.
+// Members in their order.
 plist::Dictionary packed(const tarnkit::Dictionary& dictionary);
-// Of a present value.
+// A copy of a present value, containers and all. An absent one would come out as an empty text.
 tarnkit::Value unpacked(const plist::ValueView& value);
+// The reply with values of the owner's own; outcome and error as they are.
 tarnkit::Reply unpacked(Reply&& reply);
 
 }  // namespace tarn::client

@@ -5,6 +5,9 @@
 //          -> Empty
 //          -> Broken: the positions or lengths make no sense; nothing more is to be read from this ring
 //
+//   position   given back         taken                                       head
+//              | accepted, kept . | next record ... published, not looked at  | nothing yet
+//
 // What was accepted is given back to the writer by publish(). One owner a ring, which also owns the memory. Threads:
 // one at a time.
 #pragma once
@@ -17,13 +20,17 @@
 
 namespace tarn::ring {
 
+// What next() found: a tarnring_kind that is never a filler, and the bytes of its content without the padding.
 struct Record {
   std::uint32_t kind = TARNRING_FILLER;
   std::uint32_t length = 0;
 };
 
+// What next() answers; see above.
 enum class Look { Record, Empty, Broken };
 
+// The service's end of a ring. `Words` is how the memory is touched: SharedWords, or in tests one that stops at each
+// step. Nothing here allocates, waits or makes a system call; next() costs the copy of one record.
 template <class Words = SharedWords>
 class RingConsumer {
  public:
@@ -43,8 +50,11 @@ class RingConsumer {
   }
 
   // Bytes that the buffer of next() must have.
+  // A bound that the writer can't move, since the size of the area was checked when the ring was opened.
   std::uint32_t mostContent() const noexcept { return dataBytes_ / TARNRING_RECORD_SHARE - TARNRING_RECORD_HEAD_BYTES; }
 
+  // Copies the content of the next record to `buffer` and tells its kind and length; on anything but Look::Record
+  // `buffer` and `record` mean nothing. Once Broken it stays so. Fillers are looked past.
   Look next(std::byte* buffer, Record& record) noexcept {
     if (broken_ || (taken_ == head_ && !lookForMore())) return broken_ ? Look::Broken : Look::Empty;
     std::uint64_t word = 0;
@@ -64,6 +74,7 @@ class RingConsumer {
     return next(buffer, record);  // once: a filler ends where the area ends, and one there is nothing but its head
   }
 
+  // Steps over the record that next() gave last; `record` must be that one. The writer gets its room back by publish().
   void accept(const Record& record) noexcept {
     taken_ += size_;
     if (record.kind == TARNRING_MESSAGE || record.kind == TARNRING_FRAME) {
@@ -71,15 +82,18 @@ class RingConsumer {
     }
   }
 
-  // Lets the writer use the room of what was accepted.
+  // Lets the writer use the room of what was accepted. The caller does so once a turn, since each store takes the cache
+  // line from the writer.
   void publish() noexcept {
     Words::store(&header_->taken_messages, takenMessages_);
     Words::storeRelease(&header_->taken, taken_);
   }
+  // Tells the writer that what came of everything before `position` is on the disk, and how many messages that is.
   void publishCommitted(std::uint64_t position, std::uint64_t messages) noexcept {
     Words::store(&header_->committed_messages, messages);
     Words::storeRelease(&header_->committed, position);
   }
+  // Counts a record that was refused; it is accepted like any other.
   void refuse(tarnring_refusal reason) noexcept {
     Words::store(&header_->last_refusal, reason);
     Words::store(&header_->refused, ++refused_);
@@ -87,6 +101,8 @@ class RingConsumer {
 
   // Announces a sleep, from which the writer wakes its reader. False when there is something to read: then nothing is
   // announced.
+  // The fence keeps the store of `asleep` before the load of `head`, as the writer's keeps its store of `head` before
+  // its load of `asleep`: whatever the order, one of both sees the other.
   bool prepareToSleep() noexcept {
     Words::store(&header_->asleep, sleeps_++);
     Words::fence();
@@ -94,18 +110,24 @@ class RingConsumer {
     awake();
     return false;
   }
+  // Tells the writer that nobody need be woken; to be called after each sleep.
   void awake() noexcept { Words::store(&header_->asleep, 0); }
 
+  // Position and number of messages up to which records were accepted, published or not.
   std::uint64_t taken() const noexcept { return taken_; }
   std::uint64_t takenMessages() const noexcept { return takenMessages_; }
-  // As the writer tells it, which may be wrong.
+  // As the writer tells them, which may be wrong: up to where it published, and how many records found no room.
   std::uint64_t head() const noexcept { return Words::loadAcquire(&header_->head); }
   std::uint64_t dropped() const noexcept { return Words::load(&header_->dropped); }
+  // Whether the writer said that nothing more comes. What it published before may still wait to be read.
   bool ended() const noexcept { return Words::loadAcquire(&header_->ended) != 0; }
 
  private:
+  // Where a position lies in the area, whose size is a power of two.
   std::byte* byteAt(std::uint64_t position) const noexcept { return data_ + (position & (dataBytes_ - 1)); }
 
+  // Reads how far the writer has come, when all that was known of is read. A head behind `taken_`, further ahead than
+  // the area is long, or off the grid of 8 makes the ring Broken.
   bool lookForMore() noexcept {
     const std::uint64_t head = Words::loadAcquire(&header_->head);
     if (head - taken_ > dataBytes_ || head % 8 != 0 || taken_ % 8 != 0) {
@@ -116,6 +138,8 @@ class RingConsumer {
     return head_ != taken_;
   }
 
+  // Whether the record lies within what is published, in one piece and within its bounds; of a filler, that it ends
+  // exactly with the area and that something follows it.
   bool isWhole(const Record& record) const noexcept {
     const std::uint64_t published = head_ - taken_;
     const std::uint64_t upToEnd = dataBytes_ - (taken_ & (dataBytes_ - 1));
@@ -127,9 +151,13 @@ class RingConsumer {
     return size <= published && size <= upToEnd;
   }
 
+  // The mapped memory, which the owner keeps mapped.
   tarnring_header* header_;
   std::byte* data_;
+  // Of the data area; a power of two, so that a mask makes an offset of a position.
   std::uint32_t dataBytes_;
+  // Our own copies of the numbers that we write, read from the header once: what the writer makes of them there later
+  // means nothing.
   std::uint64_t taken_;
   std::uint64_t takenMessages_;
   std::uint64_t refused_;

@@ -8,15 +8,18 @@
 
 namespace tarn {
 
+// Drivers sort their channels into groups and sub-groups; which ones are of interest is the utility's table.
 class TarnReportingDriver {
  public:
   using Name = std::optional<std::string>;
 
+  // Both may be missing, which means every channel.
   static TarnReportingDriver driverWithGroupName(Name groupName, Name subGroupName);
 
+  // Nothing: any group, and any sub-group.
   const Name& groupName() const noexcept { return groupName_; }
   const Name& subGroupName() const noexcept { return subGroupName_; }
-  // "%@-%@" of both; a missing one reads "(null)".
+  // "%@-%@" of both; a missing one reads "(null)". Snapshots are kept under it.
   std::string description() const;
 
  private:

@@ -11,11 +11,14 @@
 
 namespace tarn {
 
+// Owner: the utility, for the life of the process. Threads: any may read.
 struct TarnReportingIOChannelSubscription {
+  // Subscribed to nothing yet.
   static TarnReportingIOChannelSubscription initWithDriver(TarnReportingDriver driver) {
     return {std::move(driver), nullptr, {}};
   }
 
+  // What was asked for.
   TarnReportingDriver driver;
   std::shared_ptr<platform::FlumeSubscription> subscription;  // the service's handle
   platform::FlumeChannelSet subscribedChannels;               // those that were subscribed in fact

@@ -14,11 +14,13 @@ class TextFormatter;
 class WireReader;
 class WireWriter;
 
+// Copies are for the records themselves; a base is never copied alone.
 class MetricMessage {
  public:
   virtual ~MetricMessage() = default;
   // Takes over the fields that the reader finds; false when it failed. What was read until then stays.
   virtual bool readFrom(WireReader& reader) = 0;
+  // Fields in the order of their numbers; it can't fail.
   virtual void writeTo(WireWriter& writer) const = 0;
   // One object of this name with the fields in alphabetical order.
   virtual void formatText(TextFormatter& formatter, std::string_view name) const = 0;

@@ -15,17 +15,21 @@
 
 namespace pylonmetrics {
 
+// Objects nest, each two blanks further in. Owner: whoever renders. Threads: one formatter is for one thread at a time.
 class ProtobufText final : public TextFormatter {
  public:
   void beginObject(std::string_view name) override;
   void formatSigned(std::string_view name, std::int64_t value) override;
   void formatUnsigned(std::string_view name, std::uint64_t value) override;
+  // Line feed, carriage return and tab are \n, \r and \t; other bytes that aren't printable are three octal digits.
   void formatString(std::string_view name, std::string_view bytes) override;
   void endObject() override;
 
+  // What was rendered so far; each line ends with a line feed.
   const std::string& text() const noexcept { return text_; }
 
  private:
+  // Indents and writes the name.
   void beginLine(std::string_view name);
 
   std::string text_;

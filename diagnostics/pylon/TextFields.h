@@ -7,6 +7,8 @@
 
 namespace pylonmetrics {
 
+// For records without objects in objects: all fields land in one dictionary. Threads: one formatter is for one thread
+// at a time.
 class TextFields final : public TextFormatter {
  public:
   void beginObject(std::string_view) override {}
@@ -15,6 +17,7 @@ class TextFields final : public TextFormatter {
   void formatString(std::string_view name, std::string_view bytes) override { fields_.set(name, bytes); }
   void endObject() override {}
 
+  // In the order in which they came; of two of one name the later counts.
   const tarn::plist::Dictionary& fields() const noexcept { return fields_; }
 
  private:

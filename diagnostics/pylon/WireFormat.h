@@ -24,6 +24,7 @@ enum class WireType : std::uint8_t {
 
 // What 64 bits need at seven a byte.
 inline constexpr std::size_t kLongestVarint = 10;
+// How many bits of a varint's byte are the number's, and how many of a tag tell the layout.
 inline constexpr unsigned kVarintBits = 7;
 inline constexpr unsigned kWireTypeBits = 3;
 inline constexpr unsigned kWireTypeMask = (1U << kWireTypeBits) - 1;

@@ -13,13 +13,17 @@
 
 namespace pylonmetrics {
 
+// Owner: whoever reads; it looks at the bytes and copies none but those of strings. Threads: one reader is for one
+// thread at a time.
 class WireReader {
  public:
-  // Groups within groups beyond this depth are not skipped.
+  // Groups within groups beyond this depth are not skipped. Groups are an old form that no record of ours writes; the
+  // bound keeps hostile input from growing a list.
   static constexpr std::size_t kDeepestGroup = 100;
 
   explicit WireReader(std::string_view bytes) noexcept : bytes_(bytes) {}
 
+  // Whether all bytes are read, whether something failed, and how many bytes were read.
   bool atEnd() const noexcept { return position_ >= bytes_.size(); }
   bool failed() const noexcept { return failed_; }
   std::size_t position() const noexcept { return position_; }
@@ -34,7 +38,9 @@ class WireReader {
   [[nodiscard]] bool skip(std::uint64_t fieldNumber, unsigned type);
 
  private:
+  // Notes the failure; false, for the caller to return.
   bool fail() noexcept;
+  // False, and a failure, when fewer are left.
   bool skipBytes(std::uint64_t count) noexcept;
   bool skipGroup(std::uint64_t fieldNumber);
   bool skipSimple(unsigned type);

@@ -10,11 +10,15 @@
 
 namespace pylonmetrics {
 
+// Fields follow each other in the order of the calls; it can't fail. Owner: whoever writes. Threads: one writer is for
+// one thread at a time.
 class WireWriter {
  public:
+  // A zero is written too.
   void writeUnsigned(std::uint32_t fieldNumber, std::uint64_t value);
   // A negative value takes ten bytes, as 64 bits.
   void writeSigned(std::uint32_t fieldNumber, std::int32_t value);
+  // Any bytes; an empty text is written too.
   void writeString(std::uint32_t fieldNumber, std::string_view bytes);
 
   const std::string& bytes() const noexcept { return bytes_; }

@@ -16,22 +16,27 @@ namespace tarn {
 class TarnReportingSession;
 class TarnReportingSessionMessage;
 
+// Stateless.
 class TarnReportingSnareOperations {
  public:
-  // What stands for the identifier of a capture that the service didn't begin or didn't name.
+  // What stands for the identifier of a capture that the service didn't begin or didn't name. A text like any
+  // identifier, so that readers of the log find one in either case.
   static constexpr const char* kNoneReturned = "NONE_RETURNED";
 
-  // The identifier of the capture that a reply tells of, as text, or kNoneReturned. Logs what the reply says.
+  // The identifier of the capture that a reply tells of, as text, or kNoneReturned. Logs what the reply says. Without a
+  // reply, or with one that names no reason, the line is an error; a reason that the service gives is told at info
+  // level, but for its own faults.
   static std::string getSessionIdentifierFromResponse(const std::optional<plist::Dictionary>& response);
 
   // The reporter's form of the signature by which captures of one fault are known: the service name, the message's
-  // category and type, and the process, when there is one.
+  // category and type, and the process, when there is one. The domain is always "AudioAnalytics".
   static plist::Dictionary signatureFromMessage(const TarnReportingSessionMessage& message,
                                                 AudioServiceType audioServiceType,
                                                 platform::SnareReporter& symptomReporter,
                                                 std::optional<std::string> clientProcessName);
 
-  // What a snapshot carries: the session's processes, to which the captured system logs are narrowed down.
+  // What a snapshot carries: the session's processes, to which the captured system logs are narrowed down. A property
+  // list of the form that the service's extension for system logs reads.
   static plist::Dictionary diagnosticPayload(const TarnReportingSession& session);
 };
 

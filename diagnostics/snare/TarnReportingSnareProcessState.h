@@ -17,9 +17,11 @@ namespace tarn {
 
 struct WorkerInstanceState;
 
+// Owner: ProcessState, shared by the instances. It goes with the installed facilities, so counts don't outlive a run.
 class TarnReportingSnareProcessState {
  public:
-  // When a detector fired last, whatever the session. Its holder keeps the lock for a whole fire.
+  // When a detector fired last, whatever the session. Its holder keeps the lock for a whole fire. Holding the lock for
+  // a whole fire keeps two sessions from both finding that the last one is long ago.
   struct RateLimit {
     Mutex lock;
     std::optional<double> lastFire TARN_GUARDED_BY(lock);  // epoch seconds
@@ -32,7 +34,8 @@ class TarnReportingSnareProcessState {
   TarnReportingSnareProcessState(const TarnReportingSnareProcessState&) = delete;
   TarnReportingSnareProcessState& operator=(const TarnReportingSnareProcessState&) = delete;
 
-  // The state of a detector class; made by `make` when there is none yet, else as it is. The name is static.
+  // The state of a detector class; made by `make` when there is none yet, else as it is. The name is static. Making it
+  // is done under the lock, so it is made once.
   std::shared_ptr<WorkerInstanceState> stateFor(std::string_view className,
                                                 std::shared_ptr<WorkerInstanceState> (*make)());
   // Of the detector of stuck system sounds.
@@ -40,6 +43,7 @@ class TarnReportingSnareProcessState {
 
  private:
   Mutex mutex_;
+  // By the class's static name.
   std::map<std::string_view, std::shared_ptr<WorkerInstanceState>> states_ TARN_GUARDED_BY(mutex_);
   RateLimit systemSoundRateLimit_;
 };

@@ -31,8 +31,10 @@ class TarnReportingSession;
 class TarnReportingSessionMessage;
 struct WorkerInstanceState;
 
+// What it counts is in its state, which may be shared with the instances of other sessions.
 class TarnReportingSnareWorkerInstance {
  public:
+  // The state isn't null.
   TarnReportingSnareWorkerInstance(std::weak_ptr<TarnReportingSession> session,
                                    std::shared_ptr<WorkerInstanceState> workerState)
       : session_(std::move(session)), workerState_(std::move(workerState)) {}
@@ -42,6 +44,7 @@ class TarnReportingSnareWorkerInstance {
 
   // Nothing while it is going away.
   std::shared_ptr<TarnReportingSession> session() const noexcept { return session_.lock(); }
+  // The worker counts in it; the instance sets its thresholds and reads the reporter of a fire.
   WorkerInstanceState& workerState() const noexcept { return *workerState_; }
   // Whether the message tells of this fault. Asked of every message of every session: it looks and changes nothing.
   virtual bool interestedInMessage(const TarnReportingSessionMessage& message) const = 0;
@@ -58,12 +61,16 @@ struct TarnReportingSnareWorkerInstanceClass {
   template <std::derived_from<Instance> T>
   static constexpr TarnReportingSnareWorkerInstanceClass of();
 
+  // kClassName: what log lines and shared states call it.
   std::string_view name;
+  // Never null in a row that of() made.
   std::unique_ptr<Instance> (*initWithSession)(const std::shared_ptr<TarnReportingSession>&) = nullptr;
   // The operations that the class declares; null for those it doesn't.
   bool (*handleSingleMessageSession)() = nullptr;
+  // Called after the message was counted and before the rule is asked; the fire comes after the rule.
   void (*handleMessage)(Instance&, const TarnReportingSessionMessage&) = nullptr;
   void (*fire)(Instance&, const TarnReportingSessionMessage&) = nullptr;
+  // With the worker's own start and stop.
   void (*start)(Instance&) = nullptr;
   void (*stop)(Instance&) = nullptr;
 };

@@ -18,7 +18,9 @@ class TarnReportingSnareWorkerInstanceMurmurDestroyRecordQueue : public TarnRepo
       const std::shared_ptr<TarnReportingSession>& session);
   using TarnReportingSnareWorkerInstance::TarnReportingSnareWorkerInstance;
 
+  // False, for every message.
   bool interestedInMessage(const TarnReportingSessionMessage& message) const override;
+  // Never called, as nothing is of interest.
   void handleMessage(const TarnReportingSessionMessage& message);
 };
 

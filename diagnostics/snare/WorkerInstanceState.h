@@ -27,7 +27,8 @@ namespace platform {
 class SnareReporter;
 }
 
-// A value that may be missing, whole for whoever reads it while another thread writes it. Threads: any.
+// A value that may be missing, whole for whoever reads it while another thread writes it. Threads: any. A copy goes in
+// and out, so nobody holds the lock while looking at the value.
 template <class T>
 class TarnReportingSynchronized {
  public:
@@ -35,6 +36,7 @@ class TarnReportingSynchronized {
   TarnReportingSynchronized(const TarnReportingSynchronized&) = delete;
   TarnReportingSynchronized& operator=(const TarnReportingSynchronized&) = delete;
 
+  // A copy; nothing when none was set.
   std::optional<T> get() const {
     const MutexLock guard(mutex_);
     return value_;
@@ -49,7 +51,8 @@ class TarnReportingSynchronized {
   std::optional<T> value_ TARN_GUARDED_BY(mutex_);
 };
 
-// What the trigger rule says about an interesting message that has just been counted.
+// What the trigger rule says about an interesting message that has just been counted. Only Fire does anything; the
+// others tell tests and readers why it doesn't.
 enum class TarnReportingSnareVerdict {
   Fire,
   TooFew,       // fewer interesting messages than the threshold
@@ -57,6 +60,7 @@ enum class TarnReportingSnareVerdict {
   FiredBefore,  // it fires once, and it did
 };
 
+// Plain data with its rule; it calls nothing.
 struct WorkerInstanceState {
   // A place of its own: a reply that comes when the session and this state are gone still has where to write.
   using SnareSessionIdentifier = TarnReportingSynchronized<std::string>;
@@ -66,21 +70,27 @@ struct WorkerInstanceState {
   WorkerInstanceState(const WorkerInstanceState&) = delete;
   WorkerInstanceState& operator=(const WorkerInstanceState&) = delete;
 
-  // Whether this payload says what the last interesting message said, time stamps included.
+  // Whether this payload says what the last interesting message said, time stamps included. Nothing repeats before the
+  // first one and after a fire.
   bool repeatsLastMessage(const plist::Dictionary& payload) const noexcept;
-  // Counts an interesting message at this time, in epoch seconds.
+  // Counts an interesting message at this time, in epoch seconds. The first one since the last fire sets the time from
+  // which a threshold of time counts.
   void count(double now);
-  // Whether the message that was counted last fires at this time, in epoch seconds.
+  // Whether the message that was counted last fires at this time, in epoch seconds. The time must exceed its threshold.
+  // A clock that was set back makes it wait longer: better late than too often.
   TarnReportingSnareVerdict verdict(double now) const;
   // Restarts the count, as after a fire. How often it fired is kept.
   void reset();
 
-  // The capture that the service reported for the latest fire; never null.
+  // The capture that the service reported for the latest fire; never null. Nothing until a reply has come; a later
+  // fire's reply replaces it.
   const std::shared_ptr<SnareSessionIdentifier> currentSnareSessionIdentifier =
       std::make_shared<SnareSessionIdentifier>();
   std::uint64_t interestedCount = 0;  // since the last fire
+  // Interesting messages that it takes to fire; 0 leaves it to the time.
   std::uint64_t interestThresholdCount = std::numeric_limits<std::uint64_t>::max();
   TarnReportingSynchronized<double> interestFirstSeen;  // epoch seconds, of the first since the last fire
+  // Seconds since the first interesting message; only looked at when the count is 0.
   double interestThresholdDurationSeconds = std::numeric_limits<double>::max();
   bool oncePerSession = false;  // fires only while firedCount is 0
   std::uint64_t firedCount = 0;

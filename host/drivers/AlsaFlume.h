@@ -41,18 +41,24 @@ namespace tarn::linux_host {
 
 class AlsaFlume final : public FlumeSource {
  public:
+  // As many as the kernel has.
   static constexpr std::size_t kMostCards = 32;  // as many as the kernel has
+  // Of all cards. Each costs three small files a reading, on the server queue.
   static constexpr std::size_t kMostSubstreams = 256;
 
+  // `folder` is the root of the kernel's tree; tests give a folder that looks like it. Nothing is read before read().
   AlsaFlume(std::string folder, platform::Log& log, const platform::Clock& clock);
   AlsaFlume(const AlsaFlume&) = delete;
   AlsaFlume& operator=(const AlsaFlume&) = delete;
 
+  // Three channels for each substream that can be read, in the order of cards, PCMs and substreams by name; empty
+  // without a tree. Sums go on from the reading before, so each reading also changes what this holds.
   platform::FlumeSamples read() override;
 
  private:
-  // What was summed up of a substream.
+  // What was summed up of a substream since its first reading: of what was before, nothing counts.
   struct Sums {
+    // On the monotonic clock.
     std::chrono::nanoseconds lastReading{};
     AlsaStatus last;
     std::array<std::chrono::nanoseconds, kAlsaStateCount> residencies{};
@@ -60,6 +66,7 @@ class AlsaFlume final : public FlumeSource {
     std::uint64_t frames = 0;
     std::uint64_t overruns = 0;
   };
+  // Where one lies, each part as its folder is named.
   struct Substream {
     std::string card;  // "card0"
     std::string pcm;   // "pcm0p"
@@ -68,13 +75,17 @@ class AlsaFlume final : public FlumeSource {
   };
   using SumsByPath = std::map<std::string, Sums>;
 
+  // Those that are there now, within the bounds; says once for the life of this that there are more.
   std::vector<Substream> substreams();
+  // The card's id, as alsaName() makes it safe; the folder's name where it has none.
   std::string cardName(const std::string& card) const;
-  // Adds the substream's channels. An error is the complaint about it.
+  // Adds the substream's channels and its new sums. An error is the complaint about it, and nothing was added.
   Status read(const Substream& substream, SumsByPath& sums, platform::FlumeSamples& samples) const;
   static void addChannels(const platform::FlumeChannelName& substream, const Sums& sums,
                           platform::FlumeSamples& samples);
   static Sums begun(const AlsaStatus& status, std::chrono::nanoseconds now);
+  // Adds what happened since the last reading: the time that passed to the states of then and now, the pointer's and
+  // counter's steps, a transition where the state or its trigger time is another.
   static void advance(Sums& sums, const AlsaStatus& status, std::chrono::nanoseconds now);
 
   const std::string folder_;

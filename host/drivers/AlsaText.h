@@ -30,8 +30,11 @@ namespace tarn::linux_host {
 inline constexpr std::string_view kAlsaStates[] = {"closed",   "OPEN",   "SETUP",     "PREPARED",     "RUNNING", "XRUN",
                                                    "DRAINING", "PAUSED", "SUSPENDED", "DISCONNECTED", "other"};
 inline constexpr std::size_t kAlsaStateCount = sizeof kAlsaStates / sizeof kAlsaStates[0];
+// The place of "XRUN" in kAlsaStates.
 inline constexpr std::size_t kAlsaXrun = 5;
 
+// What one reading tells. A value that is missing or is no number is absent; a time of all zeros hasn't come yet, and
+// is absent too.
 struct AlsaStatus {
   std::size_t state = 0;                           // index into kAlsaStates
   std::optional<std::int64_t> triggerNanoseconds;  // by a clock of the stream's choice
@@ -45,11 +48,12 @@ struct AlsaInfo {
   std::string id;  // "ALC287 Analog"; printable ASCII, bounded
 };
 
-// Nothing when the text tells no state.
+// Nothing when the text tells no state, as when it was cut. Of a key that stands twice the last one counts.
 std::optional<AlsaStatus> parseAlsaStatus(std::string_view text);
-// Nothing when the text tells no direction.
+// Nothing when the text tells no direction ("stream: PLAYBACK" or "CAPTURE").
 std::optional<AlsaInfo> parseAlsaInfo(std::string_view text);
-// A name of the kernel's that is safe everywhere: its first line, printable ASCII with "?" for anything else, bounded.
+// A name of the kernel's that is safe everywhere: its first line, at most 80 bytes, without blanks at its ends,
+// printable ASCII with "?" for anything else. It becomes part of a channel's name and of log lines.
 std::string alsaName(std::string_view text);
 
 }  // namespace tarn::linux_host

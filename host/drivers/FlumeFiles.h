@@ -26,7 +26,8 @@
 
 namespace tarn::linux_host {
 
-// A reading holds the server queue up, so it stays small.
+// A reading holds the server queue up, so it stays small: it happens at the start and stop of each session, and at most
+// 4 MiB are parsed in it.
 struct FlumeFilesBounds {
   std::size_t files = 128;                          // those with the first names count
   std::size_t fileBytes = std::size_t{256} << 10U;  // a larger file holds no channels
@@ -37,10 +38,13 @@ struct FlumeFilesBounds {
 
 class FlumeFiles final : public FlumeSource {
  public:
+  // `folder` need not be there, now or ever. Nothing is read before read().
   FlumeFiles(std::string folder, platform::Log& log, const FlumeFilesBounds& bounds = {});
   FlumeFiles(const FlumeFiles&) = delete;
   FlumeFiles& operator=(const FlumeFiles&) = delete;
 
+  // The channels of all files that are right, in the order of the files' names and then the file's own; of two known
+  // alike the one in the earlier file. Logs the complaints that are new; costs a stat and a read of each file.
   platform::FlumeSamples read() override;
 
  private:
@@ -50,13 +54,18 @@ class FlumeFiles final : public FlumeSource {
 
   // What one reading has gathered. The names lie in the channels, which don't move.
   struct Gathered {
+    // A deque, because growing doesn't move what is in it.
     std::deque<platform::FlumeChannel> channels;
     std::set<const platform::FlumeChannelName*, FlumeNameOrder> names;
+    // Read so far, also of files that turned out wrong.
     std::size_t bytes = 0;
   };
 
+  // Adds the file's channels; an error is the complaint about it, of the file or of a part of it. ENOENT: it is gone.
   Status readFile(const std::string& name, Gathered& gathered) const;
+  // All that was read of a file, or nothing where the bound on channels is reached.
   Status takeChannels(Result<platform::FlumeSamples> reading, Gathered& gathered) const;
+  // The complaints that the last reading didn't have, or had otherwise.
   void tell(const Complaints& now) const;
   void complain(const std::string& name, const Error& complaint) const;
 

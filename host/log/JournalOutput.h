@@ -10,6 +10,9 @@
 // One datagram an entry, which the journal takes at once or not at all: its own library waits for a journal that
 // stalls. A field is NAME=value and a line end or, when the value has several lines, NAME, a line end, the value's
 // length in 64 bits, little-endian, the value and a line end. Threads: as LogOutput says.
+//
+// MESSAGE, CODE_FILE and CODE_LINE are the journal's own names, TARN_... are this system's; `journalctl
+// TARN_CATEGORY=CODE` selects by them. The entry's own time isn't sent: the journal stamps what it takes.
 #pragma once
 
 #include <string>
@@ -23,20 +26,29 @@ namespace tarn::linux_host {
 
 class JournalOutput final : public LogOutput {
  public:
+  // Where systemd's journal listens for entries of this form; another path serves tests.
   static constexpr const char* kSocket = "/run/systemd/journal/socket";
 
+  // Opens nothing; the path must fit a socket address (107 bytes), or open() fails.
   explicit JournalOutput(std::string socketPath = kSocket);
   JournalOutput(const JournalOutput&) = delete;
   JournalOutput& operator=(const JournalOutput&) = delete;
 
-  // Makes the socket and asks whether anybody listens at the path; what keeps it from taking entries, with the path.
+  // Makes the socket and asks, by connecting a second one, whether anybody listens at the path; what keeps it from
+  // taking entries, with the path. Called once, before write(). The send buffer is asked for 8 MiB, so that the largest
+  // entry fits one datagram; where the system grants less, a larger entry fails with EMSGSIZE and is lost alone.
   [[nodiscard]] Status open();
 
+  // The fields of one entry. Its lines stay lines, as the length of a field says where it ends; other control
+  // characters are made visible. The time isn't used.
   std::string formed(double epochSeconds, const platform::LogEntry& entry) const override;
-  // A journal that was started again is found again.
+  // Sends one datagram to the path, never waiting: EAGAIN while the journal's queue is full, ECONNREFUSED or ENOENT
+  // while none runs. As each goes to the path and not over a connection, a journal that was started again is found
+  // again.
   int write(std::string_view bytes) override;
 
  private:
+  // Not connected: see write().
   const std::string path_;
   UniqueDescriptor socket_;
 };

@@ -29,26 +29,36 @@
 
 namespace tarn::linux_host {
 
-// "connection 3 of process 41, uid 1000, /usr/bin/player"
+// "connection 3 of process 41, uid 1000, /usr/bin/player". Looks the program up under /proc, so it is for lines that
+// are rare.
 std::string describe(const LogClient& client);
 
 class LogFloodGuard final : public platform::Log {
  public:
+  // Of one kind in a window: enough to see what a client does.
   static constexpr std::uint64_t kMostLines = 100;
+  // Also how long a count waits to be told, as long as lines of any client go on coming.
   static constexpr std::chrono::seconds kWindow{10};
+  // Places times processes; a client can make processes without end, but no places. Bounds the table at about a
+  // megabyte.
   static constexpr std::size_t kMostKinds = 4096;
 
-  // Both outlive the guard.
+  // Both outlive the guard. The threshold is the next log's, read once here: entries below it aren't formed by anybody.
   LogFloodGuard(platform::Log& next, const platform::Clock& clock);
   LogFloodGuard(const LogFloodGuard&) = delete;
   LogFloodGuard& operator=(const LogFloodGuard&) = delete;
 
+  // Passes the entry on or counts it. What is nobody's, or below the level default, goes on without a look at the table
+  // and without the lock; so does what there is no memory to remember. A count of an earlier window is told before the
+  // entry that began the next.
   void write(const platform::LogEntry& entry) noexcept override;
-  // Tells at once what was left out so far.
+  // Tells at once what was left out so far and begins new windows; for the end of the process, which would lose the
+  // counts.
   void tellCounts() noexcept;
 
  private:
-  // A place in the source, and the process on whose behalf it speaks.
+  // A place in the source, and the process on whose behalf it speaks. The module is compared by its address, as a text
+  // of the program has one.
   struct Place {
     const char* module;
     int line;
@@ -58,6 +68,8 @@ class LogFloodGuard final : public platform::Log {
   struct PlaceHash {
     std::size_t operator()(const Place& place) const noexcept;
   };
+  // What was seen of one place's lines. Category, level and module are the first entry's, so that the lines about the
+  // flood stand where the flood does.
   struct Kind {
     platform::LogCategory category;
     platform::LogLevel level;
@@ -70,11 +82,18 @@ class LogFloodGuard final : public platform::Log {
     std::string who = {};  // of a flood
   };
 
+  // Counts the entry; whether it may be written. The line that begins a flood is written from in here.
   bool admit(const platform::LogEntry& entry, const LogClient& client) TARN_REQUIRES(mutex_);
+  // The row of the entry's place, made on first sight. When the table is full the process is left out of the key, so
+  // that all who come late share a row for each place.
   Kind& kindOf(const platform::LogEntry& entry, const LogClient& client, std::chrono::nanoseconds now)
       TARN_REQUIRES(mutex_);
+  // Tells the window's count, if any, and begins the next; the flood goes on when this window had more than the limit.
   void endWindow(Kind& kind, std::chrono::nanoseconds now) TARN_REQUIRES(mutex_);
+  // Once a window for all rows, not with every line: this is a walk over the whole table. Rows without a line since are
+  // forgotten here, which is what makes room.
   void endWindows(std::chrono::nanoseconds now) TARN_REQUIRES(mutex_);
+  // In the name of the kind's own place, with its prefix.
   void tell(const Kind& kind, const std::string& text) TARN_REQUIRES(mutex_);
 
   platform::Log& next_;

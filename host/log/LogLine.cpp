@@ -34,11 +34,11 @@ std::string logTime(double epochSeconds) {
   std::int64_t fraction = microseconds % kMicrosecondsPerSecond;
   fraction += fraction < 0 ? kMicrosecondsPerSecond : 0;
   std::string text;
-  const auto second = static_cast<double>((microseconds - fraction) / kMicrosecondsPerSecond);
-  if (const auto calendar = plist::calendarDate(second)) {
+  const std::int64_t second = (microseconds - fraction) / kMicrosecondsPerSecond;
+  if (const auto calendar = plist::calendarDate(static_cast<double>(second))) {
     plist::appendDateAndTime(text, *calendar, 'T');
   } else {
-    text = std::to_string((microseconds - fraction) / kMicrosecondsPerSecond);
+    text = std::to_string(second);
   }
   std::array<char, 16> decimals{};
   std::snprintf(decimals.data(), decimals.size(), ".%06lldZ", static_cast<long long>(fraction));

@@ -28,31 +28,45 @@ namespace tarn::linux_host {
 
 class QueuedLog final : public platform::Log {
  public:
-  // What may wait, in bytes of formed entries.
+  // What may wait, in bytes of formed entries: some ten thousand lines of ordinary length. One entry alone may be
+  // larger.
   static constexpr std::size_t kMostBytes = std::size_t{1} << 20;
 
-  // The clock outlives the log.
+  // The clock, which stamps the entries when they are logged, outlives the log. Nothing is written before start();
+  // entries below `threshold` are left out by those who log, as everywhere.
   QueuedLog(std::unique_ptr<LogOutput> output, const platform::Clock& clock, platform::LogLevel threshold,
             std::size_t mostBytes = kMostBytes);
   QueuedLog(const QueuedLog&) = delete;
   QueuedLog& operator=(const QueuedLog&) = delete;
-  // Gives what waits a short last while, then ends the thread.
+  // Gives what waits a last while of 200 ms, then ends the thread; what isn't written by then is lost, and nobody is
+  // left to be told. So a reader that stalls never keeps the process from ending.
   ~QueuedLog() override;
 
-  // Begins to write; what was logged before is kept for that.
+  // Begins to write, on the thread that this makes; what was logged before is kept for that. To be called once; throws
+  // when the system has no thread to give.
   void start();
+  // Forms the entry and leaves it; costs a lock and now and then the wake of the thread, and waits for no output. Also
+  // loses it, counted: with the bound reached, or without memory. Once entries are lost all are until what waited is
+  // written, so that what is told about them has one place in the log.
   void write(const platform::LogEntry& entry) noexcept override;
-  // Waits until all that was logged is written, at most so long. Whether it is.
+  // Waits until all that was logged, and the account of what was lost, is written, at most so long. Whether it is.
+  // Others may go on logging meanwhile; what they log is waited for too.
   bool settle(std::chrono::milliseconds longest);
 
  private:
   using Texts = std::vector<std::string>;
 
+  // The thread: takes all that waits at once, writes it without the lock, and sleeps when there is nothing.
   void run();
+  // In their order; stops early only when the log ends. The bytes count as waiting until they are written, or the bound
+  // would let twice as much wait.
   void writeAll(const Texts& texts);
-  // Whether it was written, or never can be; false when the log ends.
+  // Tries until it is written or never can be; false when the log ends. Between two tries it pauses, from 5 ms, doubled
+  // up to 500 ms: an output may be away for hours, and back at any time.
   bool writeOne(const std::string& text);
+  // Counts one and keeps why.
   void lose() TARN_REQUIRES(mutex_);
+  // The entry that tells how many were lost and why, with the level error.
   std::string lostLine(std::uint64_t lost, int error) const;
   bool allIsWritten() const TARN_REQUIRES(mutex_) { return bytes_ == 0 && lost_ == 0; }
 

@@ -1,4 +1,7 @@
 // settleWhileShrinking: waits for queues at the end of the process, for as long as they get shorter.
+//
+// Why not one long wait: a queue that a back-end holds would cost all of it at each end, and a long but moving one
+// could need more. So time is given as long as it is used. Threads: one that is none of the queues'.
 #pragma once
 
 #include <chrono>
@@ -7,8 +10,9 @@
 
 namespace tarn::linux_host {
 
-// Waits until nothing is unfinished, each time for so long, and no more once such a wait has finished nothing: a
-// back-end keeps the rest waiting. How much is left.
+// Waits until nothing is unfinished, `longest` at a time, and no more once such a wait has finished nothing: a back-end
+// keeps the rest waiting. How many pieces are left; 0 when all is done. New work that comes as fast as the old one goes
+// ends it too. `Queues` has unfinished() and settle(), as LinuxWorkQueues has.
 template <class Queues>
 [[nodiscard]] std::size_t settleWhileShrinking(Queues& queues, std::chrono::nanoseconds longest) {
   std::size_t left = queues.unfinished();

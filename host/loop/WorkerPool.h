@@ -44,11 +44,13 @@ class WorkerPool {
     std::size_t low = 131'072;
     bool operator==(const Marks&) const = default;
   };
+  // Called without the pool's lock, often on a pool's thread: it only tells another thread to go on.
   using RoomHandler = platform::UniqueFunction<void()>;
 
   struct Line;
 
-  // The clock outlives the pool.
+  // The clock outlives the pool. `marks.low` lies below `marks.high`, so that those who stopped don't stop again at
+  // once. Makes no thread.
   WorkerPool(const platform::Clock& clock, Marks marks) : clock_(clock), marks_(marks) {}
   WorkerPool(const WorkerPool&) = delete;
   WorkerPool& operator=(const WorkerPool&) = delete;
@@ -64,23 +66,32 @@ class WorkerPool {
   // uncalled.
   void stop();
 
+  // Gathered: while a thread is about to look again by itself, which is within half a millisecond, nobody is woken.
+  // AtOnce: that look happens now.
   enum class Urgency { Gathered, AtOnce };
+  // Runs `work` as that of this line, after what the line was given before.
   void add(const std::shared_ptr<Line>& line, platform::Work work, Urgency urgency = Urgency::Gathered);
+  // Hands it over once `delay` has passed, not before; at once without one. It counts as unfinished from its moment on.
   void addAfter(const std::shared_ptr<Line>& line, std::chrono::nanoseconds delay, platform::Work work);
-  // By work of the line.
+  // By work of the line, as its last step: no piece of it begins until resume() or until `longest` has passed; then
+  // `next` runs first. It is one unfinished piece all the while.
   void suspend(const std::shared_ptr<Line>& line, std::chrono::nanoseconds longest, platform::Work next);
+  // From any thread, also while the piece that suspended still runs, and when the time was up already: then nothing
+  // happens.
   void resume(const std::shared_ptr<Line>& line);
-  // Waits, at most so long, until no thread runs the line; then, if it stands in the pool's line, takes its next turn
-  // on the caller's thread.
+  // For a thread that would else wait for the line: waits, at most so long, until no thread of the pool runs it; then,
+  // if it stands in the pool's line, takes its next turn (at most 64 pieces) on the caller's thread. Does nothing for
+  // work of the line itself.
   void help(const std::shared_ptr<Line>& line, std::chrono::nanoseconds longest);
 
   // Pieces handed over and not yet finished, of all queues; what is suspended counts, what is delayed does not.
   std::size_t unfinished() const;
+  // One load, for each request.
   bool isFull() const noexcept { return full_.load(std::memory_order_relaxed); }
   // Calls `done` once all that is unfinished now is finished, on a thread of the pool or at once on the caller's. It is
   // destroyed uncalled with work that is.
   void afterWhatIsUnfinished(platform::Work done);
-  // Waits until nothing is unfinished; false when `longest` passed first.
+  // Blocks until nothing is unfinished; false when `longest` (an hour at most) passed first. Not for work of the pool.
   [[nodiscard]] bool settle(std::chrono::nanoseconds longest);
 
  private:
@@ -89,20 +100,34 @@ class WorkerPool {
   // By deadline, equal ones in the order of the calls.
   using Suspensions = std::map<std::pair<std::chrono::nanoseconds, std::uint64_t>, std::shared_ptr<Line>>;
 
+  // A thread's whole life: due moments, a line's turn, a look, a sleep, in this order of preference.
   void serve();
+  // After the threads: breaks the circles of queues and their work.
   void destroyWhatIsLeft();
+  // Without the lock: `next` and pieces that the line has taken, until it is suspended or had its handful. How many
+  // ran.
   static std::size_t runTurn(Line& line, platform::Work next);
+  // Puts work into the line and the line, unless it is there, is run or is suspended, at the end of the pool's.
   void enqueue(const std::shared_ptr<Line>& line, platform::Work work) TARN_REQUIRES(mutex_);
   void schedule(const std::shared_ptr<Line>& line) TARN_REQUIRES(mutex_);
+  // The line may stand in the pool's line again; its `next` counts as waiting from here on.
   void endSuspension(Suspensions::iterator suspension) TARN_REQUIRES(mutex_);
+  // Moves everything whose moment has come to its line. One look at the clock, none when nothing is delayed.
   void takeDue() TARN_REQUIRES(mutex_);
+  // False without the memory for it; what wasn't taken is still there.
   bool takeDuePieces(std::chrono::nanoseconds now) TARN_REQUIRES(mutex_);
   std::optional<std::chrono::nanoseconds> nextMoment() const TARN_REQUIRES(mutex_);
+  // One more; at the high mark the pool is full.
   void countUnfinished() TARN_REQUIRES(mutex_);
+  // If anybody sleeps.
   void wakeOne() TARN_REQUIRES(mutex_);
+  // Sees that somebody wakes by the earliest moment, when it has just become earlier.
   void watchNextMoment() TARN_REQUIRES(mutex_);
+  // A short wait, out of which a thread comes by itself. At most one thread is in it.
   void look() TARN_REQUIRES(mutex_);
+  // Until somebody wakes it or the earliest moment comes.
   void sleep() TARN_REQUIRES(mutex_);
+  // A turn of the line that stands there in the pool's line, and its place in the lists after it.
   void runSome(Lines::iterator place) TARN_REQUIRES(mutex_);
   void account(std::size_t finished) TARN_REQUIRES(mutex_);
 
@@ -130,7 +155,8 @@ class WorkerPool {
   bool over_ TARN_GUARDED_BY(mutex_) = false;  // the threads are gone
 };
 
-// The state of one queue. Lives as long as the queue or work for it.
+// The state of one queue. Lives as long as the queue or work for it: a queue that its last owner dropped still runs
+// what it holds.
 struct WorkerPool::Line {
   // Under the pool's lock.
   Lines place{nullptr};  // what stands for it in the pool's lists; it is here while it is in none

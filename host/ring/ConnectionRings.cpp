@@ -163,6 +163,7 @@ bool ConnectionRings::serveRing(RingReader& reader, std::size_t& share) {
       reader.finished = reader.finished || reader.ending() || reader.consumer().ended();
       return false;
     }
+    owner->workOffRingRequest();
   }
   reader.finished = reader.finished || owner == nullptr || reader.isAtEnd();
   return false;

@@ -17,7 +17,7 @@
 
 namespace tarn::linux_host {
 
-// Which memory file it is, whatever descriptor leads to it.
+// Which memory file it is, whatever descriptor leads to it. Its number isn't used again while it is mapped.
 struct RingIdentity {
   dev_t device = 0;
   ino_t inode = 0;
@@ -36,24 +36,34 @@ class RingMemory {
   RingMemory& operator=(const RingMemory&) = delete;
   ~RingMemory();
 
-  // Maps the file; what is wrong with it, or nothing. The descriptor may be closed afterwards.
+  // Maps the file, for reading and writing and with all its pages present; what is wrong with it, or nothing. It must
+  // be memory of ordinary pages (large ones may be missing when they are touched), sealed against shrinking, growing
+  // and other seals, as long as a header and a power of two, with a header that says so. The descriptor may be closed
+  // afterwards; the mapping holds the file. A mapping from before is given up.
   [[nodiscard]] std::optional<RingFault> map(int descriptor);
+  // Nothing of the memory may be looked at afterwards. The destructor does it too.
   void unmap() noexcept;
 
+  // Shared with the client, who may change every byte at any moment: read it word by word, once, and check what was
+  // read. Only after map().
   tarnring_header* header() const noexcept { return static_cast<tarnring_header*>(mapping_); }
   std::byte* data() const noexcept { return static_cast<std::byte*>(mapping_) + TARNRING_HEADER_BYTES; }
+  // Bytes of the area behind the header, as the file's size said when it was mapped; the header's own number isn't
+  // used.
   std::uint32_t dataBytes() const noexcept { return dataBytes_; }
+  // Of the file that is mapped.
   const RingIdentity& identity() const noexcept { return identity_; }
 
  private:
   void swap(RingMemory& other) noexcept;
 
+  // Null before map(); header and data area behind it.
   void* mapping_ = nullptr;
   std::uint32_t dataBytes_ = 0;
   RingIdentity identity_;
 };
 
-// Whether the descriptor is an eventfd. Another kind would be ready to read for ever, or never.
+// Whether the descriptor is an eventfd, by what /proc calls it. Another kind would be ready to read for ever, or never.
 bool isEventDescriptor(int descriptor);
 
 }  // namespace tarn::linux_host

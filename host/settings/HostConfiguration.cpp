@@ -110,6 +110,8 @@ Status takeRate(const toml::node& node, std::size_t& setting) {
   return takeWithin<0, 1'000'000'000>(node, setting);
 }
 
+constexpr std::int64_t kMostBytes = std::int64_t{1} << 40U;
+
 struct Setting {
   std::string_view section;
   std::string_view key;
@@ -118,7 +120,7 @@ struct Setting {
 
 using Node = const toml::node&;
 using Host = HostConfiguration&;
-constexpr std::array<Setting, 22> kSettings{{
+constexpr std::array<Setting, 26> kSettings{{
     {"tally", "in_use", [](Node node, Host host) { return take(node, host.tally.inUse); }},
     {"rtc", "backends", [](Node node, Host host) { return take(node, host.rtc.backends); }},
     {"rtc", "no_backends", [](Node node, Host host) { return take(node, host.rtc.noBackends); }},
@@ -149,6 +151,16 @@ constexpr std::array<Setting, 22> kSettings{{
      [](Node node, Host host) { return takeWithin<65536, 1073741824>(node, host.limits.quotas.waitingBytesPerUser); }},
     {"limits", "waiting_bytes",
      [](Node node, Host host) { return takeWithin<65536, 1073741824>(node, host.limits.quotas.waitingBytes); }},
+    {"limits", "log_bytes_per_session",
+     [](Node node, Host host) { return takeWithin<65536, kMostBytes>(node, host.limits.logs.bytesOfSession); }},
+    {"limits", "log_bytes",
+     [](Node node, Host host) { return takeWithin<65536, kMostBytes>(node, host.limits.logs.bytesInAll); }},
+    {"limits", "log_bytes_per_connection",
+     [](Node node, Host host) {
+       return takeWithin<65536, kMostBytes>(node, host.limits.quotas.logBytesPerConnection);
+     }},
+    {"limits", "log_bytes_per_user",
+     [](Node node, Host host) { return takeWithin<65536, kMostBytes>(node, host.limits.quotas.logBytesPerUser); }},
     {"limits", "messages_per_second_per_connection",
      [](Node node, Host host) { return takeRate(node, host.limits.quotas.messagesPerSecondPerConnection); }},
     {"limits", "messages_per_second_per_user",

@@ -1,6 +1,8 @@
 // HostConfiguration: the service's configuration file (TOML), read into the structures that use it. What the file
-// leaves out keeps its default there. Unknown keys, wrong types and values outside their range are errors. Threads:
-// any; plain data.
+// leaves out keeps its default there, so no default stands in two places. Unknown keys, wrong types and values outside
+// their range are errors: a setting that is misspelt must not be one that is silently off.
+//
+// Reading changes nothing but what it returns. Threads: any; plain data.
 #pragma once
 
 #include <optional>
@@ -16,15 +18,19 @@
 
 namespace tarn::linux_host {
 
+// The whole file, its sections as members. Equal configurations are the same in every setting.
 struct HostConfiguration {
+  // [tally]: which analytics events anybody wants. The others are not recorded, nor formed.
   struct Tally {
     std::vector<std::string> inUse{"*"};  // glob patterns of the event names that somebody wants
     bool operator==(const Tally&) const = default;
   };
+  // [snare]: how the stand-in for bug capture answers.
   struct Snare {
     std::optional<platform::SnareReason> refuse;  // with what bug captures are refused; empty in the file: they aren't
     bool operator==(const Snare&) const = default;
   };
+  // [paths]: places outside the defaults. Each is taken as written: a relative one is the working directory's.
   struct Paths {
     std::optional<std::string> diagnosticLogs;  // the folder that holds DiagnosticLogs/; else the state directory
     std::optional<std::string> flume;  // the folder of driver report channels; else flume/ in the state directory
@@ -34,20 +40,25 @@ struct HostConfiguration {
   };
 
   Tally tally;
+  // [rtc]: how the stand-in for real-time-communication reporting answers.
   tarn::recorder::RecorderRtcReportingService::Behaviour rtc;
   Snare snare;
   Paths paths;
+  // [recorder]: whether there is one, and what it keeps.
   bool recorderEnabled = true;  // false: nothing stands in for the back-ends, and nothing is recorded
   tarn::recorder::RecorderOptions recorder;
+  // [limits]: those of the host's bounds that an operator may set; the others keep their constants.
   HostLimits limits;
 
   bool operator==(const HostConfiguration&) const = default;
 };
 
-// Reads the file; at most 1 MiB. An error reads "NAME:LINE: what is wrong", or "NAME: why it can't be read"; then the
-// defaults stand beside it.
+// Reads the file; at most 1 MiB. An error reads "NAME:LINE: what is wrong", in one line whatever the file holds, and is
+// the one that stands first in the file; or "NAME: why it can't be read". Then the defaults stand beside it. A file
+// that isn't there is such an error: who may do without one asks first.
 Result<HostConfiguration> readConfiguration(const std::string& path);
-// The same of a text that is in memory; `name` stands for the file in errors.
+// The same of a text that is in memory; `name` stands for the file in errors. No file is looked at, nor are those that
+// settings name.
 Result<HostConfiguration> parseConfiguration(std::string_view text, std::string_view name);
 
 }  // namespace tarn::linux_host

@@ -1,4 +1,7 @@
-// Where the service and its tool find each other when nobody names a place. Threads: any.
+// Where the service and its tool find each other when nobody names a place. Both ask here, so they agree.
+//
+// Pure functions of the environment, which current() alone looks at: tests make their own. Nothing is asked of the
+// disk, so a path that is given need not be there. Threads: any.
 #pragma once
 
 #include <optional>
@@ -16,14 +19,14 @@ struct HostEnvironment {
   std::string program = {};        // the path of this program
   std::string serviceSocket = {};  // TARNREPORTING_SOCKET: where clients look for the service
 
-  // That of this process.
+  // That of this process. To be asked before other threads change variables.
   static HostEnvironment current();
 };
 
 // $XDG_RUNTIME_DIR/tarnreporting.sock, for root /run/tarnreporting/socket; nothing when there is no such variable.
 std::optional<std::string> defaultSocketPath(const HostEnvironment& environment);
-// Where a client looks for the service, in this order: the place that the environment names, else the user's and the
-// system's.
+// Where a client looks for the service, in this order: the place that the environment names, and then nothing else;
+// without that the user's and the system's. Never empty.
 std::vector<std::string> serviceSocketPaths(const HostEnvironment& environment);
 // The configuration of the installation that the program is part of: of PREFIX/bin that is
 // PREFIX/etc/tarnreporting/tarnreportingd.toml, but /etc/... for the prefix /usr and /etc/PREFIX/... for one in /opt.

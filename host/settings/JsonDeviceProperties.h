@@ -1,8 +1,9 @@
 // JsonDeviceProperties: what the device is, from a file that holds one JSON object of properties:
 // {"InternalBuild": false, "haptics": false}. Without a file the device has neither property.
 //
-// A property that the system knows must be true or false; others are taken as they are, for newer systems.
-// Threads: any; it never changes once it is made.
+// A property that the system knows must be true or false; others are taken as they are, for newer systems. Owned by the
+// platform and loaded at the start: a device doesn't change while it runs. Threads: any; it never changes once load()
+// is over.
 #pragma once
 
 #include <optional>
@@ -17,13 +18,15 @@ namespace tarn::linux_host {
 
 class JsonDeviceProperties final : public platform::DeviceProperties {
  public:
-  // The device without a file.
+  // The device without a file: both known properties are there and false.
   JsonDeviceProperties();
 
-  // Takes the properties of the file instead, all or none. An error reads "FILE:LINE:COLUMN: text", "FILE:LINE: text"
-  // or "FILE: text". At most 1 MiB is read.
+  // Takes the properties of the file instead, all or none: one that the file leaves out is unknown then, not false. An
+  // error reads "FILE:LINE:COLUMN: text", "FILE:LINE: text" or "FILE: text", and the properties are as they were. At
+  // most 1 MiB is read. To be called before anybody asks.
   [[nodiscard]] Status load(const std::string& path);
 
+  // Nothing for a property that the file doesn't have, and for one that is no boolean.
   std::optional<bool> boolean(std::string_view name) const override;
 
  private:

@@ -1,4 +1,5 @@
-// isPlainName: which names stand for files. Threads: any.
+// isPlainName: which names stand for files: those of suites and notifications, which come from other programs and must
+// lead nowhere else. Threads: any.
 #pragma once
 
 #include <cstddef>

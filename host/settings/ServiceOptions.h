@@ -1,4 +1,6 @@
-// ServiceOptions: the command line of tarnreportingd. Threads: one at a time.
+// ServiceOptions: the command line of tarnreportingd.
+//
+// Parsing looks at no file and changes nothing, so tests try every line without a service. Threads: one at a time.
 #pragma once
 
 #include <optional>
@@ -10,31 +12,38 @@
 
 namespace tarn::linux_host {
 
-// Exit statuses of the service.
+// Exit statuses of the service, which packages and the service manager rely on; 64 and 78 are those of sysexits.h.
 inline constexpr int kExitSuccess = 0;
 inline constexpr int kExitFailure = 1;         // it can't serve: state directory, socket, log
 inline constexpr int kExitKilled = 2;          // a client asked for the end
 inline constexpr int kExitUsage = 64;          // wrong options
 inline constexpr int kExitConfiguration = 78;  // a wrong configuration or device-properties file
 
+// What the options say, with the defaults for those that weren't given. Paths are as they were written.
 struct ServiceOptions {
   std::optional<std::string> socketPath;  // nothing: none named and no default, so the listener must be handed over
   bool socketIsDefault = false;           // then its folder is the service's own to make
+  // Never empty: without the option and without a default the command line is wrong.
   std::string stateDirectory;
+  // One that is named must be there.
   std::optional<std::string> configurationFile;
   std::string defaultConfigurationFile;  // read when none is named and it is there
+  // Nothing: the device has neither of the known properties.
   std::optional<std::string> devicePropertiesFile;
+  // What is logged, from this level on, and where: "stderr", "journal" or a file's path.
   platform::LogLevel logLevel = platform::LogLevel::Default;
   std::string logTarget = "stderr";
 };
 
-// What a command line asks for.
+// What a command line asks for: exactly one of its members says so.
 struct ServiceCommand {
   std::optional<ServiceOptions> options;  // nothing: print what there is and exit
   std::string output;                     // for stdout: the help or the version
   Status usage;                           // wrong: the code is the exit status, the text names the option
 };
 
+// Reads `arguments` as main() gets them, the program's name first. An option given with an empty value and one that
+// isn't known are wrong usage: the status is 64 and the text one line.
 ServiceCommand parseServiceCommand(int argumentCount, const char* const* arguments, const HostEnvironment& environment);
 
 }  // namespace tarn::linux_host

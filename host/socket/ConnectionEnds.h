@@ -44,7 +44,8 @@ class ConnectionEnds {
       then();
     }
   }
-  // Calls `then` once all ends that are under way now are over: at once when there is none.
+  // Calls `then` once all ends that are under way now are over: at once when there is none. Ends that begin later
+  // aren't waited for, so a stream of clients that go can't hold anybody up. It is destroyed uncalled with this.
   void afterThese(platform::Work then) {
     if (ends_.empty()) {
       then();
@@ -54,6 +55,7 @@ class ConnectionEnds {
   }
 
  private:
+  // Somebody who waits for the ends up to this number; numbers only grow, so those who wait stand in order.
   struct Waiting {
     std::uint64_t after;
     platform::Work then;

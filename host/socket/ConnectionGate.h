@@ -20,19 +20,23 @@ namespace tarn::linux_host {
 
 class ConnectionGate {
  public:
-  // The loop outlives the gate.
+  // The loop outlives the gate. `maxQueuedWork` counts pieces of the queue's own list: work of lanes is bounded by one
+  // request each.
   ConnectionGate(const MainLoop& loop, std::size_t maxQueuedWork) : loop_(loop), maxQueuedWork_(maxQueuedWork) {}
   ConnectionGate(const ConnectionGate&) = delete;
   ConnectionGate& operator=(const ConnectionGate&) = delete;
 
-  // Asked for every request: must be cheap. Whoever answers true wakes the queue when that ends.
+  // Asked for every request: must be cheap. Whoever answers true wakes the queue when that ends, or connections would
+  // wait for the next event. Set before anything runs; without one only the queue counts.
   void setPauseSource(platform::UniqueFunction<bool()> shouldPause) { shouldPause_ = std::move(shouldPause); }
 
-  // Asked likewise: whether there is little room left.
+  // Asked likewise, and only while the gate is open: whether there is little room left.
   void setCrowdSource(platform::UniqueFunction<bool()> isCrowded) { isCrowded_ = std::move(isCrowded); }
 
+  // Whether a request may be taken: a few loads and a question, nothing is changed.
   bool open() { return loop_.queue()->ready() < maxQueuedWork_ && !loop_.waits() && !(shouldPause_ && shouldPause_()); }
 
+  // Whether those that took much of what was done lately are to wait now; never without a source.
   bool crowded() { return isCrowded_ && isCrowded_(); }
 
   // Connections that stopped at a request; each tells when it stops and when it goes on or ends.
@@ -42,6 +46,7 @@ class ConnectionGate {
 
  private:
   const MainLoop& loop_;
+  // HostLimits::maxQueuedWork.
   std::size_t maxQueuedWork_;
   platform::UniqueFunction<bool()> shouldPause_;
   platform::UniqueFunction<bool()> isCrowded_;

@@ -1,7 +1,9 @@
-// ConnectionHost: what all connections of the listener share.
+// ConnectionHost: what all connections of the listener share: limits, the ledger, the gate, the turns, what is under
+// way, and the scratch space of decoding. It knows no connection but as one that is open and can be ended.
 //
-// Owned by the platform; outlives the listener and the connections. Threads: the main loop's, but for
-// resumeRequests().
+//   a turn of the loop:  the queue's own work -> the rings' look -> serveShares(): turns of connections -> flushes
+//
+// Owned by the platform; outlives the listener and the connections. Threads: the main loop's, but for resumeRequests().
 #pragma once
 
 #include <unordered_set>
@@ -27,16 +29,22 @@ namespace tarn::linux_host {
 class OpenConnection {
  public:
   virtual ~OpenConnection() = default;
-  // From now on nothing more comes in: the connection ends as if its client had closed it now.
+  // From now on nothing more comes in: the connection ends as if its client had closed it now. What had come is served,
+  // the end is the usual one. Again does nothing more.
   virtual void endInput() = 0;
+  // Tells its user's quotas what its sessions' logs take now, which others' messages change too.
+  virtual void noteLogBytes() = 0;
 };
 
 class ConnectionHost {
  public:
+  // Who answers `status`, and who says when everything is committed: the platform, which alone knows the service and
+  // the recorder.
   using StatusSource = platform::UniqueFunction<plist::Dictionary()>;
   using SettleSource = platform::UniqueFunction<void(platform::Work done)>;
 
-  // Loop and log outlive the host, and the loop runs no more when the host ends.
+  // Loop and log outlive the host, and the loop runs no more when the host ends: the turn's hooks and the queue's pause
+  // source that it leaves there call back here.
   ConnectionHost(MainLoop& mainLoop, platform::Log& logSink, const HostLimits& hostLimits = {})
       : loop(mainLoop),
         log(logSink),
@@ -50,27 +58,40 @@ class ConnectionHost {
   ConnectionHost(const ConnectionHost&) = delete;
   ConnectionHost& operator=(const ConnectionHost&) = delete;
 
-  // The answer to `status`; without one it is the ledger alone.
+  // The answer to `status`; without one it is the ledger alone, as in tests. Asked at the request, so what it costs
+  // holds up everybody.
   void setStatusSource(StatusSource source) { status_ = std::move(source); }
+  // A dictionary of counts and levels of this moment, the rings' among them.
   plist::Dictionary status() {
     plist::Dictionary answer = status_ ? status_() : ledger.status(0, loop.queue()->waiting(), {});
     rings.counts.describe(answer);
     return answer;
   }
 
-  // Connections note themselves while they are open.
+  // Connections note themselves while they are open; this holds none of them.
   void add(OpenConnection& connection) { open_.insert(&connection); }
   void remove(OpenConnection& connection) { open_.erase(&connection); }
-  // Ends all connections in order.
+  // Ends all connections in order, as when a signal ends the service. They end one after another in later turns.
   void endInputs() {
     for (OpenConnection* connection : open_) {
       connection->endInput();
     }
   }
 
+  // The quotas with what everybody has of them now; part of `status`.
+  plist::Dictionary quotaUse() {
+    shares.forEachParty([](ShareParty& party) { party.largestLog = 0; });
+    for (OpenConnection* connection : open_) {
+      connection->noteLogBytes();
+    }
+    return quotaStatus(limits.quotas, shares);
+  }
+
   // How `settle` finds out that what was handed over so far is committed; `done` is work of the server queue then, and
-  // is destroyed uncalled when it never will be. Without one there is nothing to commit.
+  // is destroyed uncalled when it never will be. Without one there is nothing to commit. Set before anything runs.
   void setSettleSource(SettleSource source) { settle_ = std::move(source); }
+  // Calls `done` when everything that was handed over before is on the disk, what the ends of connections made
+  // included.
   void settle(platform::Work done) {
     ends.afterThese([this, done = std::move(done)]() mutable {
       if (settle_) {
@@ -81,12 +102,15 @@ class ConnectionHost {
     });
   }
 
-  // Whether requests of this user may be taken now, and its long work may go on; null: of one that isn't known.
+  // Whether requests of this user may be taken now, and its long work may go on; null: of one that isn't known. False
+  // for everybody while the gate is shut, and for heavy users while it is crowded.
   bool takesFrom(const ShareParty* party) {
     return gate.open() && (party == nullptr || !gate.crowded() || !shares.isHeavy(*party));
   }
 
-  // Looks after half frames as long as there are some.
+  // Looks after half frames as long as there are some: by one timer at an eighth of the time that they have, and at
+  // once when they are too many bytes. While the gate is shut nothing is read, so nobody can complete one, and their
+  // time begins anew.
   void watchHalfFrames() {
     if (halfFrames.overfull()) {
       halfFrames.sweep(loop.clock().monotonic());
@@ -105,9 +129,11 @@ class ConnectionHost {
     watchesHalfFrames_ = true;
   }
 
-  // Tells that the pause source's answer changed. Threads: any.
+  // Tells that the pause source's answer changed: there is one more turn, in which the held requests are looked at.
+  // Threads: any.
   void resumeRequests() { loop.queue()->wake(); }
 
+  // The parts that connections use, open to them: each has its own header and says there what it does.
   MainLoop& loop;
   platform::Log& log;
   const HostLimits limits;
@@ -116,21 +142,27 @@ class ConnectionHost {
   FairShares shares;
   ConnectionEnds ends;
   HalfFrames halfFrames;
+  // After the loop and the log, on which it stands.
   RingBoard rings;
-  // One for all connections: it keeps nothing between frames but scratch space and the key lists seen lately.
+  // One for all connections: it keeps nothing between frames but scratch space and the key lists seen lately. A request
+  // is served or held before the next one is decoded, so `request` and `refusal` are free again each time.
   wire::RequestDecoder decoder;
   wire::DecodedRequest request;
   wire::Refusal refusal;
-  // Whether replies to a client that has more requests waiting may be gathered over some turns; not at the end.
+  // Whether replies to a client that has more requests waiting may be gathered over some turns, which saves system
+  // calls; not at the end of the process, when there may be no further turn.
   bool gathersReplies = true;
 
  private:
-  // Cost of the requests that are served before the sockets are looked at again. A lone client need not give way.
+  // Cost of the requests that are served before the sockets are looked at again, in units of about a microsecond: a
+  // client that sends a request now waits for this much of the others'. A lone client need not give way, so a look at
+  // the sockets is shared by more requests.
   static constexpr std::int64_t kCostPerTurn = 128;
   static constexpr std::int64_t kCostPerTurnAlone = 512;
-  // Within the time that a half frame may take.
+  // Within the time that a half frame may take: one that is late is cut off at most an eighth later.
   static constexpr int kLooksAtHalfFrames = 8;
 
+  // The turn's hook. When the budget is used up and somebody could go on, the loop doesn't sleep.
   void serveShares() {
     const bool more = shares.serve(ledger.connectionsOpen > 1 ? kCostPerTurn : kCostPerTurnAlone,
                                    [this](const ShareParty& party) { return takesFrom(&party); });
@@ -140,8 +172,10 @@ class ConnectionHost {
   }
 
   StatusSource status_;
+  // From their resume() to their end.
   std::unordered_set<OpenConnection*> open_;
   SettleSource settle_;
+  // A timer is set.
   bool watchesHalfFrames_ = false;
 };
 

@@ -34,10 +34,19 @@ struct RecorderCounts {
   std::uint64_t lostBefore = 0;  // of the run before: handed over, and not committed when it was killed
 };
 
+// What the logs of the sessions take.
+struct LogCounts {
+  std::uint64_t bytes = 0;          // in memory
+  std::uint64_t overflowBytes = 0;  // on disk
+  std::uint64_t overflowing = 0;    // that have messages there
+  std::uint64_t failures = 0;       // times that there was no room
+  std::uint64_t lost = 0;           // messages that couldn't be read back
+};
+
 // What the service accounts for: its sessions, and what became of the messages, by members that are told as they are.
 struct ServiceCounts {
-  ServiceCounts(std::uint64_t sessionCount = 0) noexcept
-      : sessions(sessionCount) {}  // NOLINT(google-explicit-constructor)
+  // NOLINTNEXTLINE(google-explicit-constructor): where nothing else is counted, the number of sessions will do
+  ServiceCounts(std::uint64_t sessionCount = 0) noexcept : sessions(sessionCount) {}
 
   std::uint64_t sessions;
   std::uint64_t delivered = 0;
@@ -46,6 +55,7 @@ struct ServiceCounts {
   std::uint64_t undeliverable = 0;
   std::uint64_t withoutSession = 0;
   std::uint64_t refused = 0;
+  LogCounts logs;
 
   std::uint64_t dealtWith() const noexcept {
     return delivered + redundant + unwanted + undeliverable + withoutSession + refused;

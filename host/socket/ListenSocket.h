@@ -18,6 +18,7 @@ namespace tarn::linux_host {
 
 class ListenSocket {
  public:
+  // Owner and group may connect; who is in the group is for the installation to say.
   static constexpr mode_t kDefaultMode = 0660;
 
   ListenSocket() = default;
@@ -25,26 +26,33 @@ class ListenSocket {
   ListenSocket& operator=(ListenSocket&& other) noexcept;
   ListenSocket(const ListenSocket&) = delete;
   ListenSocket& operator=(const ListenSocket&) = delete;
-  // Closes it; a socket file that listen() made is removed when it is still the same one.
+  // Closes it; a socket file that listen() made is removed when it is still the same one, and so is the lock's. One
+  // that was handed over stays with the service manager.
   ~ListenSocket();
 
-  // The socket that the service manager handed over (LISTEN_FDS), taken out of the environment. Neither socket nor
-  // error when it handed over none; an error when it is more than one or not a listening Unix stream socket.
+  // The socket that the service manager handed over (LISTEN_FDS), taken out of the environment, so that no child takes
+  // it for its own. Neither socket nor error when it handed over none; an error when it is more than one or not a
+  // listening Unix stream socket. To be called once, at the start.
   static Result<ListenSocket> takeHandedOver();
-  // The right to this path, which no other service gets from here on. Nothing is there to connect to before listen().
-  // An error is one line that names the path.
+  // The right to this path, which no other service gets from here on; a socket file that nobody listens on is removed.
+  // Nothing is there to connect to before listen(). An error is one line that names the path: another service has it
+  // (EADDRINUSE), it is longer than a socket's address may be, it is no socket, or its folder can't be written. Never
+  // waits for another service.
   static Result<ListenSocket> claim(const std::string& path);
   // Listens at the claimed path, with this file mode before anybody can connect; one that was handed over listens
-  // already.
+  // already, and so does one that this was called for before. An error names the path.
   [[nodiscard]] Status listen(mode_t mode = kDefaultMode);
 
+  // Doesn't block; -1 before listen(). It stays this object's.
   int descriptor() const noexcept { return socket_.get(); }
   // Whether there is one, claimed or listening.
   explicit operator bool() const noexcept { return socket_ || lock_; }
   // "/run/x/socket", or "handed over".
+  // For log lines.
   const std::string& name() const noexcept { return name_; }
 
  private:
+  // What its end does, and another socket's taking its place.
   void close() noexcept;
 
   UniqueDescriptor socket_;

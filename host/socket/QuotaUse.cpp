@@ -1,5 +1,6 @@
 #include "host/socket/QuotaUse.h"
 
+#include <algorithm>
 #include <utility>
 
 #include "host/socket/Quotas.h"
@@ -12,6 +13,11 @@ void QuotaUse::noteSessions(std::size_t sessions) noexcept {
 
 void QuotaUse::noteWaitingBytes(std::size_t bytes) noexcept {
   party_.waitingBytes += bytes - std::exchange(waitingBytes_, bytes);
+}
+
+void QuotaUse::noteLogBytes(std::size_t bytes) noexcept {
+  party_.logBytes += bytes - std::exchange(logBytes_, bytes);
+  party_.largestLog = std::max(party_.largestLog, bytes);
 }
 
 std::string QuotaUse::refusalOfSession() const {
@@ -28,6 +34,16 @@ std::string QuotaUse::refusalOfWaitingBytes(std::size_t more) const {
   const std::size_t limit = quotas_.waitingBytesPerUser;
   if (party_.waitingBytes + more <= limit) return {};
   return overQuota("waiting_bytes", party_.waitingBytes, limit);
+}
+
+std::string QuotaUse::refusalOfLog() const {
+  if (logBytes_ >= quotas_.logBytesPerConnection) {
+    return overQuota("log_bytes", logBytes_, quotas_.logBytesPerConnection);
+  }
+  if (party_.logBytes >= quotas_.logBytesPerUser) {
+    return overQuota("log_bytes", party_.logBytes, quotas_.logBytesPerUser);
+  }
+  return {};
 }
 
 std::string QuotaUse::refusalOfMessage(std::int64_t second) {

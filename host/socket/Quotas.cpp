@@ -31,13 +31,18 @@ plist::Dictionary quotaStatus(const HostLimits::Quotas& quotas, const FairShares
                                  {"sessions_per_user", quotas.sessionsPerUser},
                                  {"waiting_bytes_per_user", quotas.waitingBytesPerUser},
                                  {"waiting_bytes", quotas.waitingBytes},
+                                 {"log_bytes_per_connection", quotas.logBytesPerConnection},
+                                 {"log_bytes_per_user", quotas.logBytesPerUser},
                                  {"messages_per_second_per_connection", quotas.messagesPerSecondPerConnection},
                                  {"messages_per_second_per_user", quotas.messagesPerSecondPerUser}};
   plist::Dictionary users;
   shares.forEachParty([&](const ShareParty& party) {
     if (users.size() == kMostUsers) return;
-    const plist::Dictionary use{
-        {"connections", party.connections}, {"sessions", party.sessions}, {"waiting_bytes", party.waitingBytes}};
+    const plist::Dictionary use{{"connections", party.connections},
+                                {"sessions", party.sessions},
+                                {"waiting_bytes", party.waitingBytes},
+                                {"log_bytes", party.logBytes},
+                                {"log_bytes_of_one_connection", party.largestLog}};
     users.set(plist::Key(std::to_string(party.user)), use);
   });
   return {{"limits", limits}, {"users", users}};

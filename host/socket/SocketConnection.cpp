@@ -17,23 +17,10 @@ namespace tarn::linux_host {
 namespace {
 
 constexpr std::string_view kModule = "SocketConnection";
-// Replies that are sent before the turn's end, so that a gulp of small requests doesn't pile up large replies.
-constexpr std::size_t kEarlyFlushBytes = 262144;
-// While a client has more requests to be served, its replies are gathered up to so many bytes and for so many turns.
-constexpr std::size_t kGatheredReplyBytes = 4096;
-constexpr int kMostFlushesPutOff = 8;
 // Received bytes in a unit of cost.
 constexpr std::size_t kReceivedBytesPerCost = 8192;
 // Of the end of a connection.
 constexpr std::size_t kEndCost = 24;
-// Numbers of a reply that are encoded at once, and in a unit of cost.
-constexpr std::size_t kNumbersAtOnce = 2048;
-constexpr std::size_t kNumbersPerCost = 128;
-
-// Made without memory: it is short enough for the string itself.
-std::string outOfMemoryText() noexcept {
-  return std::string(wire::kOutOfMemory);
-}
 
 ucred peerOf(const UniqueDescriptor& socket) {
   ucred peer{.pid = 0, .uid = static_cast<uid_t>(-1), .gid = static_cast<gid_t>(-1)};
@@ -177,11 +164,16 @@ ShareHolder::Turn SocketConnection::takeTurn(std::int64_t credit) {
       more = true;
     }
   }
-  return {lane_.spent(), more};
+  return {lane_.spent() + std::exchange(ringCost_, 0), more};
 }
 
 void SocketConnection::countSessions() {
   use_.noteSessions(object_ != nullptr ? object_->sessionCount() : 0);
+  noteLogBytes();
+}
+
+void SocketConnection::noteLogBytes() {
+  use_.noteLogBytes(object_ != nullptr ? object_->logBytes() : 0);
 }
 
 // The request that is held, and input that waits for the rest of its frame: so much of it.
@@ -281,127 +273,6 @@ void SocketConnection::endInput() {
   }
 }
 
-template <class Content>
-void SocketConnection::reply(std::uint64_t id, const Content& content) noexcept {
-  if ((state_ != State::Open && state_ != State::Ending) || output_.broken()) {
-    output_.countDropped();
-    return;
-  }
-  try {
-    output_.append(id, content);
-  } catch (const std::bad_alloc&) {
-    replyShortly(id);
-    return;
-  }
-  flushSoon();
-}
-
-void SocketConnection::refuseRequest(std::uint64_t id, wire::ErrorCode code, std::string why) noexcept {
-  if (code == wire::ErrorCode::OutOfMemory) {
-    MemoryReserve::count(MemoryReserve::Loss::Request);
-  }
-  lane_.spend(1);
-  host_.ledger.countRefusal(code);
-  reply(id, platform::RemoteError{wire::kErrorDomain, static_cast<std::int64_t>(code), std::move(why)});
-}
-
-void SocketConnection::refuseForMemory(std::uint64_t id) noexcept {
-  refuseRequest(id, wire::ErrorCode::OutOfMemory, outOfMemoryText());
-}
-
-// In the place of a reply that is too large for the memory that there is: an error, and without the memory for that the
-// connection's end.
-void SocketConnection::replyShortly(std::uint64_t id) noexcept {
-  const bool appended = MemoryReserve::orGiveUp(MemoryReserve::Loss::Connection, [&] {
-    const platform::RemoteError error{wire::kErrorDomain, static_cast<std::int64_t>(wire::ErrorCode::OutOfMemory),
-                                      outOfMemoryText()};
-    output_.append(id, error);
-  });
-  if (!appended) {
-    output_.countDropped();
-    cut(CutReason::OutOfMemory, outOfMemoryText);
-  } else {
-    MemoryReserve::count(MemoryReserve::Loss::Request);
-    host_.ledger.countRefusal(wire::ErrorCode::OutOfMemory);
-    flushSoon();
-  }
-}
-
-// After a reply was appended.
-void SocketConnection::flushSoon() noexcept {
-  const bool waitsForRoom = (watchedEvents_ & EPOLLOUT) != 0;
-  if (output_.unsentBytes() > (waitsForRoom ? host_.limits.maxUnreadReplyBytes : kEarlyFlushBytes)) {
-    flush();
-  } else if (!waitsForRoom && !flushAsked_) {
-    flushAsked_ = true;
-    host_.loop.flushLater(shared_from_this());
-  }
-}
-
-void SocketConnection::sendReply(std::uint64_t id, std::initializer_list<plist::ValueView> results) {
-  reply(id, results);
-}
-
-void SocketConnection::sendNumbers(std::uint64_t id, std::vector<std::int64_t> numbers) {
-  sendRest({id, std::move(numbers)});
-}
-
-// In the connection's own line, ahead of its next request.
-void SocketConnection::sendRest(NumbersReply numbers) noexcept {
-  const std::uint64_t id = numbers.id();
-  try {
-    numbers.encode(kNumbersAtOnce);
-    if (numbers.whole()) {
-      reply(id, numbers);
-      return;
-    }
-    lane_.spend(kNumbersAtOnce / kNumbersPerCost);
-    host_.loop.queue()->asyncIn(lane_, [this, rest = std::move(numbers)]() mutable { sendRest(std::move(rest)); });
-  } catch (const std::bad_alloc&) {
-    refuseForMemory(id);
-    return;
-  }
-  if (WorkLane::currentOf(host_.loop.queue().get()) != &lane_) {
-    host_.shares.ready(self());
-  }
-}
-
-void SocketConnection::sendError(std::uint64_t id, const platform::RemoteError& error) {
-  reply(id, error);
-}
-
-bool SocketConnection::gathersReplies() {
-  if (queued() && host_.gathersReplies && host_.gate.open() && output_.unsentBytes() < kGatheredReplyBytes &&
-      flushesPutOff_ < kMostFlushesPutOff) {
-    ++flushesPutOff_;
-    return true;
-  }
-  flushesPutOff_ = 0;
-  return false;
-}
-
-void SocketConnection::flush() {
-  const LogClientScope scope(client_);
-  flushAsked_ = gathersReplies();
-  if (flushAsked_) {
-    host_.loop.flushLater(shared_from_this());
-    return;
-  }
-  if (!socket_ || !output_.sendSome(socket_.get())) return;
-  const std::size_t unsent = output_.unsentBytes();
-  if (state_ != State::Open) {
-    if (unsent > host_.limits.maxUnreadReplyBytes) {
-      output_.breakOff();
-    }
-  } else if (unsent > host_.limits.maxUnreadReplyBytes) {
-    cut(CutReason::UnreadReplies, [&] { return std::to_string(unsent) + " bytes of replies left unread"; });
-  } else if (unsent != 0) {
-    watch(watchedEvents_ | EPOLLOUT);
-  } else {
-    watch(watchedEvents_ & ~std::uint32_t{EPOLLOUT});
-  }
-}
-
 void SocketConnection::peerEnded(bool reset) {
   const std::size_t half = frames_.pendingBytes();
   if (half != 0) {
@@ -414,21 +285,17 @@ void SocketConnection::peerEnded(bool reset) {
   beginEnd(reset);
 }
 
-template <class Why>
-void SocketConnection::cut(CutReason reason, const Why& why) noexcept {
+bool SocketConnection::countCut(CutReason reason) noexcept {
   if (state_ != State::Open) {  // it ends already
     output_.breakOff();
-    return;
+    return false;
   }
   host_.ledger.countCut(reason);
-  const bool told = MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, [&] {
-    logPrefixed(host_.log, kConnectionCategory, platform::LogLevel::Error, kModule,
-                "cut off " + description() + ": " + why());
-  });
-  if (!told) {
-    logPrefixed(host_.log, kConnectionCategory, platform::LogLevel::Error, kModule, description_);
-  }
-  beginEnd(true);
+  return true;
+}
+
+void SocketConnection::tellCut(std::string_view line) noexcept {
+  logPrefixed(host_.log, kConnectionCategory, platform::LogLevel::Error, kModule, line);
 }
 
 void SocketConnection::beginEnd(bool interrupted) {

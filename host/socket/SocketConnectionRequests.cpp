@@ -108,6 +108,8 @@ void SocketConnection::settle(std::uint64_t id) {
 
 std::string SocketConnection::quotaRefusal(const wire::Request& request) {
   if (request.operation == wire::Operation::SendMessage) {
+    noteLogBytes();
+    if (std::string why = use_.refusalOfLog(); !why.empty()) return why;
     if (!use_.limitsMessages()) return {};
     const auto now = host_.loop.clock().monotonic();
     return use_.refusalOfMessage(std::chrono::duration_cast<std::chrono::seconds>(now).count());
@@ -146,7 +148,20 @@ void SocketConnection::serveRingRequest(wire::DecodedRequest& request) {
   }
   const WorkLane::Scope scope(&lane_);
   dispatchRequest(request, *object_, {});
-  host_.shares.ready(self());
+}
+
+// Ahead of the connection's turn while that is cheap, and charged to it: what one message needs for a moment is then
+// in the cache still when the next one needs it. Work that waits for its turn is not overtaken.
+void SocketConnection::workOffRingRequest() {
+  if (lane_.pieces() == 1 && ringCost_ < FairShares::kQuantum) {
+    const LogClientScope scope(client_);
+    lane_.beginTurn(FairShares::kQuantum - ringCost_);
+    runLane();
+    ringCost_ += lane_.spent();
+  }
+  if (!lane_.empty()) {
+    host_.shares.ready(self());
+  }
 }
 
 void SocketConnection::afterRingRequests(platform::Work work) {

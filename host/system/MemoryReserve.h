@@ -63,7 +63,9 @@ class MemoryReserve {
   // Whether all blocks are there, after getting back those that were given when there is memory. True before hold().
   static bool isWhole() noexcept;
 
+  // One more was given up.
   static void count(Loss loss) noexcept;
+  // Since the process began.
   static Counts counts() noexcept;
 
   // Does `work`; what memory is missing for in it is given up there and counted. Whether it came to its end.
@@ -79,7 +81,9 @@ class MemoryReserve {
   }
 
  private:
+  // The handler of operator new: returns when it is worth another try.
   static void handleShortage();
+  // Whether all blocks are there again.
   static bool refill() noexcept;
 
   static inline thread_local bool refusable_ = false;

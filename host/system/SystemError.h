@@ -1,4 +1,7 @@
-// The error of a system call as a value.
+// The error of a system call as a value, and as the end of a log line.
+//
+// The one place where an errno value becomes text: `Error::code` is the number, `Error::text` the system's words for
+// it. Threads: any; unlike strerror(3) nothing is shared. Each call makes a text, so it stands on paths that failed.
 #pragma once
 
 #include <cerrno>
@@ -9,10 +12,12 @@
 
 namespace tarn::linux_host {
 
+// "2, No such file or directory" for ENOENT. 0 gives "Success", which no caller asks for.
 inline Error systemError(int number) {
   return {number, std::generic_category().message(number)};
 }
-// Of the call that failed last on this thread.
+// Of the call that failed last on this thread. To be asked before anything else is called, closing a descriptor
+// included.
 inline Error lastSystemError() {
   return systemError(errno);
 }
@@ -21,6 +26,7 @@ inline Error lastSystemError() {
 inline std::string errorSuffix(const Error& error) {
   return ": " + error.text;
 }
+// The same for an errno value.
 inline std::string errorSuffix(int number) {
   return errorSuffix(systemError(number));
 }

@@ -31,7 +31,8 @@ class LinuxPerfDataWriters final : public platform::PerfDataWriters {
   LinuxPerfDataWriters(const LinuxPerfDataWriters&) = delete;
   LinuxPerfDataWriters& operator=(const LinuxPerfDataWriters&) = delete;
 
-  // There are no flags: with any the error is EINVAL.
+  // Makes the file beside its place ("PATH.PROCESS.NUMBER"); its folder must be there. There are no flags: with any the
+  // error is EINVAL. Every later failure, of a full disk too, shows at the writer's close().
   Result<std::unique_ptr<platform::PerfDataWriter>> open(std::string_view path, std::string_view name,
                                                          std::int32_t resultsVersion, std::uint32_t flags) override;
 

@@ -32,11 +32,15 @@ class TraceThread;
 
 class LinuxPerformanceTraceService final : public platform::PerformanceTraceService {
  public:
+  // What `parts` refer to outlives this and its traces. No thread is made yet.
   explicit LinuxPerformanceTraceService(const TraceParts& parts, const PerformanceTraceLimits& limits = {});
+  // shutdown(), which waits for the write that is under way.
   ~LinuxPerformanceTraceService() override;
   LinuxPerformanceTraceService(const LinuxPerformanceTraceService&) = delete;
   LinuxPerformanceTraceService& operator=(const LinuxPerformanceTraceService&) = delete;
 
+  // Null, with an error line, for a configuration that isn't supported, after shutdown(), and when the machine has no
+  // thread left. A session records nothing before its start; letting go of it removes what it has written.
   std::shared_ptr<platform::PerformanceTraceSession> createSession(
       const platform::PerformanceTraceConfiguration& configuration) override;
   // Ends every trace as letting go of it does, and the thread. Sessions that still exist do nothing any more. Not to be

@@ -7,8 +7,10 @@
 
 namespace tarn::plist {
 
+// Appends four characters for each three bytes, the last ones padded with "=".
 void appendBase64(std::string& out, std::string_view bytes);
-// The bytes of a text; nothing when it is no such text.
+// The bytes of a text; nothing when it is no such text: a wrong character, a blank included, a length that is no
+// multiple of 4, padding in the middle, bits left over that aren't 0.
 std::optional<std::string> decodeBase64(std::string_view text);
 
 }  // namespace tarn::plist

@@ -39,6 +39,7 @@ struct PropertyListFault {
   std::string description() const;
 };
 
+// Either a value or a fault.
 struct PropertyListReading {
   Value value;  // absent when there is a fault
   std::optional<PropertyListFault> fault;

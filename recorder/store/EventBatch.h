@@ -16,10 +16,12 @@ namespace tarn::recorder {
 
 class EventBatch {
  public:
+  // One event; its dictionaries are shared with whoever handed it over.
   struct Event {
     std::string_view backend;  // a text that lives for ever
     double time;               // epoch seconds
     std::size_t nameAt;        // where the name begins in the names
+    // Bytes.
     std::size_t nameSize;
     std::size_t bytes;  // what the event is counted for
     plist::Dictionary payload;
@@ -32,19 +34,26 @@ class EventBatch {
   // Without the memory for it nothing has changed.
   std::size_t add(std::string_view backend, std::string_view name, plist::Dictionary payload, plist::Dictionary detail,
                   double time);
+  // Lets go of all events and keeps the room.
   void clear() noexcept;
+  // Costs nothing; each keeps the other's room.
   void swap(EventBatch& other) noexcept;
 
   bool empty() const noexcept { return events_.empty(); }
   std::size_t size() const noexcept { return events_.size(); }
+  // Of all events, as add() counted them.
   std::size_t bytes() const noexcept { return bytes_; }
+  // Valid until the next add(), as is its name.
   const Event& operator[](std::size_t index) const noexcept { return events_[index]; }
+  // Of an event of this batch.
   std::string_view name(const Event& event) const noexcept {
     return std::string_view(names_).substr(event.nameAt, event.nameSize);
   }
 
  private:
+  // Names lie apart, as a text each would be an allocation each.
   std::vector<Event> events_;
+  // One after the other, in the events' order.
   std::string names_;
   std::size_t bytes_ = 0;
 };

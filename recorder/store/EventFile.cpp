@@ -1,57 +1,32 @@
 #include "recorder/store/EventFile.h"
 
 #include <sqlite3.h>
-#include <sys/stat.h>
 
 #include <algorithm>
-#include <cerrno>
 #include <cmath>
 #include <string>
-#include <system_error>
 #include <utility>
 
-#include "recorder/store/MappedGuard.h"
 #include "recorder/store/Remedy.h"
 #include "recorder/store/StoreLayout.h"
+#include "recorder/store/files/MappedGuard.h"
 
 namespace tarn::recorder {
 
 namespace {
 
+constexpr std::int64_t kLogHeaderBytes = 32;
 constexpr std::int64_t kFrameHeaderBytes = 24;
 constexpr int kBusyMilliseconds = 50;
-
-// Makes the folders above the file where they are missing; the opening tells when that failed. They come from the host
-// in its own way; here only one that was taken away while the service runs is made again.
-void makeFoldersAbove(const std::filesystem::path& path) {
-  std::filesystem::path folder;
-  for (const auto& part : path.parent_path()) {
-    folder /= part;
-    static_cast<void>(::mkdir(folder.c_str(), 0750));
-  }
-}
-
-Error statusError(int error) {
-  return {SQLITE_IOERR_FSTAT, "its status can't be read (" + std::generic_category().message(error) + ")"};
-}
 
 }  // namespace
 
 EventFile::EventFile(std::filesystem::path path, const RetentionLimits& limits, const platform::Clock& clock,
                      std::string boot)
-    : path_(std::move(path)), clock_(clock), retention_(limits), time_(clock, std::move(boot)) {}
-
-Result<EventFile::Identity> EventFile::readIdentity() const {
-  struct stat status {};
-  if (::stat(path_.c_str(), &status) == 0) {
-    return {{static_cast<std::uint64_t>(status.st_dev), static_cast<std::uint64_t>(status.st_ino)}};
-  }
-  const int error = errno;
-  return {{}, error == ENOENT ? Error{SQLITE_READONLY_DBMOVED, "it is gone"} : statusError(error)};
-}
+    : files_(std::move(path), clock), retention_(limits), time_(clock, std::move(boot)) {}
 
 Status EventFile::open() {
-  Status error = checkPath();
+  Status error = files_.prepare();
   if (error.ok()) {
     error = openConnection();
   }
@@ -70,51 +45,18 @@ Status EventFile::open() {
   if (error.failed()) {
     closeAfterFault();
   } else {
-    checked_ = opened_;
-    checkpointer_.open(path_.string());
+    files_.noteGood();
+    checkpointer_.open(path().string());
   }
   return error;
 }
 
-Status EventFile::checkPath() {
-  if (auto error = putOddCompanionsAside(); error.failed()) return error;
-  struct stat status {};
-  if (::stat(path_.c_str(), &status) == 0) {
-    // A directory, a pipe or a device can be opened, or hang in it; none can be a database.
-    if (S_ISREG(status.st_mode)) return {};
-    return Error{SQLITE_NOTADB, "not a regular file"};
-  }
-  if (const int error = errno; error != ENOENT) return statusError(error);
-  makeFoldersAbove(path_);
-  return {};
-}
-
-// A directory, a pipe or a link in the place of the log or its index is none of ours, and no link is followed.
-Status EventFile::putOddCompanionsAside() {
-  for (const char* const suffix : {"-wal", "-shm"}) {
-    const std::string name = path_.string() + suffix;
-    struct stat status {};
-    if (::lstat(name.c_str(), &status) != 0 || S_ISREG(status.st_mode)) continue;
-    const std::filesystem::path aside = freeName(suffix);
-    std::error_code failure;
-    std::filesystem::rename(name, aside, failure);
-    if (failure) {
-      return Error{SQLITE_CANTOPEN, name + " is no regular file and can't be set aside: " + failure.message()};
-    }
-    putAside_.push_back(aside.filename().string());
-  }
-  return {};
-}
-
 Status EventFile::openConnection() {
   MappedGuard::guardSqlite();
-  tornBefore_ = MappedGuard::torn();
-  indexBytes_ = 0;
-  const int code = connection_.open(path_.string(), SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE);
+  files_.forgetCompanions();
+  const int code = connection_.open(path().string(), SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE);
   if (code != SQLITE_OK) return connection_.errorOf(code);
-  const Result<Identity> identity = readIdentity();
-  if (identity.failed()) return Error{SQLITE_IOERR_FSTAT, identity.error->text + " right after it was opened"};
-  opened_ = identity.value;
+  if (auto error = files_.noteOpened(); error.failed()) return error;
   // Without the right to write SQLite falls back to reading.
   if (sqlite3_db_readonly(connection_.handle(), "main") == 1) {
     return Error{SQLITE_READONLY, "the file can't be written to (read-only)"};
@@ -128,7 +70,6 @@ Status EventFile::openConnection() {
       },
       &logPages_);
   logPages_ = 0;
-  logInode_ = 0;
   if (auto error = prepareConnection(connection_); error.failed()) return error;
   const Result<std::int64_t> bytes = connection_.readInteger("PRAGMA page_size");
   pageBytes_ = bytes.value;
@@ -139,7 +80,7 @@ Status EventFile::openConnection() {
 }
 
 Status EventFile::checkContent() {
-  if (checked_ != opened_) {
+  if (!files_.isKnownGood()) {
     if (auto error = checkPages(connection_); error.failed()) return error;
   }
   bool made = false;
@@ -230,7 +171,7 @@ void EventFile::closeAfterFault() noexcept {
 
 void EventFile::closeForAnotherLook() noexcept {
   closeAfterFault();
-  checked_ = {};
+  files_.forgetGood();
 }
 
 void EventFile::leave() noexcept {
@@ -241,45 +182,22 @@ void EventFile::leave() noexcept {
   closeAfterFault();
 }
 
-std::filesystem::path EventFile::freeName(const std::string& suffix) const {
-  const std::string base =
-      path_.string() + ".damaged-" + std::to_string(static_cast<std::int64_t>(clock_.epochSeconds()));
-  std::filesystem::path name = base + suffix;
-  std::error_code ignored;
-  for (int n = 2; std::filesystem::exists(std::filesystem::symlink_status(name, ignored)); ++n) {
-    name = base + "-" + std::to_string(n) + suffix;
-  }
-  return name;
-}
-
 Result<std::filesystem::path> EventFile::setAside() {
-  const std::filesystem::path aside = freeName("");
-  std::error_code failure;
-  std::filesystem::rename(path_, aside, failure);
-  if (!failure) {
+  auto aside = files_.setAside();
+  if (!aside.failed()) {
     expected_ = 0;
   }
-  if (failure) return {{}, Error{failure.value(), "it can't be set aside: " + failure.message()}};
-  // The log and its index go along: what they hold belongs to the old file, and a fresh one must not find them.
-  for (const char* const suffix : {"-wal", "-shm"}) {
-    std::filesystem::rename(path_.string() + suffix, aside.string() + suffix, failure);
-    if (failure && failure != std::errc::no_such_file_or_directory) {
-      std::filesystem::remove(path_.string() + suffix, failure);
-    }
-  }
-  return {aside};
+  return aside;
 }
 
 Status EventFile::begin() {
-  const Result<Identity> now = readIdentity();
-  if (now.failed()) return now.error;
-  if (now.value != opened_) return Error{SQLITE_READONLY_DBMOVED, "another file is in its place"};
+  if (auto error = files_.checkIsOpened(); error.failed()) return error;
   if (auto error = checkLog(); error.failed()) return error;
-  if (auto error = checkIndex(); error.failed()) {
+  if (auto error = files_.checkIndex(); error.failed()) {
     closeForAnotherLook();
     return error;
   }
-  indexBytes_ = indexBytes();
+  files_.noteIndex();
   nextId_ = lastId_ + 1;
   expiring_ = 0;
   group_.begin(nextId_, time_.seconds());
@@ -290,35 +208,21 @@ Status EventFile::begin() {
 // hands, and is brought in; one that was cut is not.
 Status EventFile::checkLog() {
   if (logPages_ == 0) return {};
-  struct stat status {};
-  const std::string name = path_.string() + "-wal";
-  const bool isThere = ::stat(name.c_str(), &status) == 0;
-  if (!isThere && errno != ENOENT) return statusError(errno);
-  constexpr std::int64_t kHeaderBytes = 32;
-  const std::int64_t frameBytes = pageBytes_ + kFrameHeaderBytes;
-  if (isThere && logInode_ == 0) {
-    logInode_ = status.st_ino;
+  const auto log = files_.lookAtLog(kLogHeaderBytes + logPages_ * (pageBytes_ + kFrameHeaderBytes));
+  if (log.failed()) return log.error;
+  switch (log.value) {
+    case StoreFiles::LogState::Whole:
+      return {};
+    case StoreFiles::LogState::Gone:
+      checkpointer_.finish();
+      sqlite3_wal_checkpoint_v2(connection_.handle(), nullptr, SQLITE_CHECKPOINT_PASSIVE, nullptr, nullptr);
+      closeForAnotherLook();
+      return Error{SQLITE_IOERR, "its log was taken away"};
+    case StoreFiles::LogState::Cut:
+      closeForAnotherLook();
+      return Error{SQLITE_IOERR, "its log was cut"};
   }
-  if (!isThere || status.st_ino != logInode_) {
-    checkpointer_.finish();
-    sqlite3_wal_checkpoint_v2(connection_.handle(), nullptr, SQLITE_CHECKPOINT_PASSIVE, nullptr, nullptr);
-    closeForAnotherLook();
-    return Error{SQLITE_IOERR, "its log was taken away"};
-  }
-  if (status.st_size >= kHeaderBytes + logPages_ * frameBytes) return {};
-  closeForAnotherLook();
-  return Error{SQLITE_IOERR, "its log was cut"};
-}
-
-std::int64_t EventFile::indexBytes() const {
-  struct stat status {};
-  return ::stat((path_.string() + "-shm").c_str(), &status) == 0 ? std::int64_t{status.st_size} : 0;
-}
-
-// Where the log's index is cut, SQLite would take old pages for the newest.
-Status EventFile::checkIndex() const {
-  if (MappedGuard::torn() == tornBefore_ && indexBytes() >= indexBytes_) return {};
-  return Error{SQLITE_IOERR, "the index of its log was cut"};
+  return {};
 }
 
 Status EventFile::append(const StoredEvent& event) {
@@ -421,7 +325,7 @@ Status EventFile::expire(std::chrono::steady_clock::time_point deadline) {
 
 Status EventFile::commit() {
   int code = writeGroup();
-  if (auto error = checkIndex(); error.failed()) {
+  if (auto error = files_.checkIndex(); error.failed()) {
     closeForAnotherLook();
     return error;
   }
@@ -467,13 +371,16 @@ Status EventFile::checkpointIfDue() {
     logPages_ = 0;
   }
   const std::int64_t bytes = logPages_ * pageBytes_;
-  if (bytes < logLimit_ || (bytes < 2 * logLimit_ && checkpointer_.begin())) return {};
+  // After a failure nothing is well before it works: a file that was opened again counts its log from the next commit.
+  const bool isDue = bytes >= logLimit_ || bringInFailed_;
+  if (!isDue || (bytes < 2 * logLimit_ && !bringInFailed_ && checkpointer_.begin())) return {};
   checkpointer_.finish();
   int pages = 0;
   const int code = sqlite3_wal_checkpoint_v2(connection_.handle(), nullptr, SQLITE_CHECKPOINT_PASSIVE, &pages, nullptr);
   // A reader in the way is no fault: the rest is brought in later.
   if ((code & 0xFF) == SQLITE_BUSY) return {};
-  if (code == SQLITE_OK) {
+  bringInFailed_ = code != SQLITE_OK;
+  if (!bringInFailed_) {
     logPages_ = 0;
   }
   return connection_.errorOf(code);

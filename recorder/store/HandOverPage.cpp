@@ -9,8 +9,8 @@
 #include <cerrno>
 #include <system_error>
 
-#include "recorder/store/MappedGuard.h"
 #include "recorder/store/RowHash.h"
+#include "recorder/store/files/MappedGuard.h"
 
 namespace tarn::recorder {
 

@@ -18,7 +18,9 @@
 
 namespace tarn::recorder {
 
+// What is kept; both hold at once.
 struct RetentionLimits {
+  // Of the database's pages in use. A sixteenth below it deleting begins.
   std::int64_t maxBytes;
   double maxAgeSeconds;
 };
@@ -29,9 +31,11 @@ class Retention {
   Retention(const Retention&) = delete;
   Retention& operator=(const Retention&) = delete;
 
+  // As what lies beside the database takes more or less of the cap; holds from the next expire() on.
   void setMaxBytes(std::int64_t maxBytes) noexcept { limits_.maxBytes = maxBytes; }
-  // Gets ready for a connection, or lets go of it.
+  // Gets ready for a connection, which outlives it until finalize(). SQLite's result code.
   [[nodiscard]] int prepare(Connection& connection);
+  // Lets go of the connection's statements; safe without any.
   void finalize() noexcept;
 
   // Removes events until all is within the limits or `deadline` has passed; at least one step is done. `now` is of the
@@ -43,16 +47,25 @@ class Retention {
   bool hasMore() const noexcept { return hasMore_; }
 
  private:
+  // The lowest id; `any` is false in an empty file.
   [[nodiscard]] int readOldest(std::int64_t& id, bool& any);
+  // Where the events that are too old end, by their groups; at most `atMost`.
   [[nodiscard]] int readAgedBefore(double cutoff, std::int64_t atMost, std::int64_t& before);
+  // Removes the events before this id, with their groups and noted losses, and notes that the file holds what comes
+  // after.
   [[nodiscard]] int removeBefore(std::int64_t id, std::uint64_t& removed);
   [[nodiscard]] int readPragma(Statement& pragma, std::int64_t& value);
+  // Of the file, and of its pages in use.
   [[nodiscard]] int readSizes(std::int64_t& fileBytes, std::int64_t& usedBytes);
+  // 256 ids at the most, a few milliseconds' work.
   [[nodiscard]] int removeSlice(double now, std::int64_t newest, bool& removedAny, std::uint64_t& removed);
+  // 64 pages at the most, and only where the file is over its limit.
   [[nodiscard]] int giveBackPages(bool& gaveAny);
 
   RetentionLimits limits_;
+  // Between prepare() and finalize().
   Connection* connection_ = nullptr;
+  // Prepared once for each connection, as they run with every commit.
   Statement oldest_;
   Statement pageCount_;
   Statement freePages_;
@@ -61,6 +74,7 @@ class Retention {
   Statement removeGroups_;
   Statement removeLosses_;
   Statement keepHoldsAfter_;
+  // Of a page of the database, as prepare() found it.
   std::int64_t pageBytes_ = 0;
   bool hasMore_ = false;
 };

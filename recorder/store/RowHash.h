@@ -1,7 +1,8 @@
 // RowHash: checksums of recorded rows, against bits that flip on a disk. Not against people.
 //
 // Each step is a bijection of what was hashed so far, so two texts that differ within eight bytes never hash alike.
-// Threads: any.
+// What it gives is written into files: it never changes, on no machine. It takes eight bytes a step, as it stands in
+// the way of every event. Owner: whoever hashes one row. Threads: one at a time.
 #pragma once
 
 #include <bit>
@@ -14,12 +15,15 @@ namespace tarn::recorder {
 
 class RowHash {
  public:
+  // What follows is hashed on what came before, so the order counts.
   void add(std::uint64_t value) noexcept {
     state_ = (state_ ^ value) * 0x9E3779B97F4A7C15ULL;
     state_ ^= state_ >> 32U;
   }
-  // SQLite keeps no negative zero and stores what isn't a number as nothing.
+  // By its bits, but for what SQLite doesn't keep: a negative zero becomes zero, and what isn't a number nothing, which
+  // reads as zero.
   void add(double value) noexcept { add(std::bit_cast<std::uint64_t>(value == 0 || value != value ? 0.0 : value)); }
+  // Its length first, so that two texts in a row aren't the same as one.
   void add(std::string_view text) noexcept {
     add(std::uint64_t{text.size()});
     std::size_t at = 0;
@@ -30,6 +34,7 @@ class RowHash {
       add(chunk(text.substr(at)));
     }
   }
+  // Of all that was added so far.
   std::uint64_t value() const noexcept { return state_; }
 
  private:
@@ -46,6 +51,7 @@ class RowHash {
     return value;
   }
 
+  // The digits of pi, as a beginning that nobody chose.
   std::uint64_t state_ = 0x243F6A8885A308D3ULL;
 };
 

@@ -17,7 +17,7 @@
 
 namespace tarn::recorder {
 
-// Ids from the first to the last.
+// Ids from the first to the last, both included.
 struct IdRange {
   std::int64_t first = 0;
   std::int64_t last = 0;
@@ -25,25 +25,31 @@ struct IdRange {
   friend bool operator==(const IdRange&, const IdRange&) = default;
 };
 
-// Adds to ranges that rise, joining neighbours.
+// Adds to ranges that rise, joining neighbours. `range` begins no earlier than the last one.
 void addRange(std::vector<IdRange>& ranges, IdRange range);
+// Ids in all of them.
 std::int64_t countOf(const std::vector<IdRange>& ranges);
 // "3, 5-9 and 2 more ranges": the first eight.
 std::string textOf(const std::vector<IdRange>& ranges);
 
 class StoreCheck {
  public:
+  // The connection outlives it. As new, it counts as done.
   explicit StoreCheck(Connection& connection) : connection_(connection) {}
   StoreCheck(const StoreCheck&) = delete;
   StoreCheck& operator=(const StoreCheck&) = delete;
 
-  // Starts again. An error is one of reading; the check is then to be started again.
+  // Starts again, with what was noted as lost by now. An error is one of reading; the check is then to be started
+  // again.
   [[nodiscard]] Status begin();
-  // Passes over what is too damaged to be read, and counts it as lost.
+  // Passes over what is too damaged to be read, 16 ids at a time, and counts it as lost; for a report. Without it such
+  // a page is an error.
   void tolerateDamage() noexcept { tolerant_ = true; }
-  // Goes on until the deadline; at least one group is looked at.
+  // Goes on until the deadline; at least one group is looked at. Between two calls events may come and go.
   [[nodiscard]] Status goOn(std::chrono::steady_clock::time_point deadline);
+  // Whether it came to the last id.
   bool isDone() const noexcept { return done_; }
+  // Ends it; what was found so far stays.
   void finalize() noexcept;
 
   // What was found so far: how many rows are as they were written, and the ids of those that aren't. Known are the ids
@@ -54,20 +60,30 @@ class StoreCheck {
   const std::vector<IdRange>& knownLost() const noexcept { return knownLost_; }
 
  private:
+  // What the recorder has noted as lost, in rising order.
   [[nodiscard]] Status readKnown();
+  // The group that was read, and before it the ids that no group holds.
   [[nodiscard]] Status lookAtGroup();
+  // Ids from `first` up to but without `end`; without a group nothing proves them.
   [[nodiscard]] Status lookAtRows(std::int64_t first, std::int64_t end, const EventGroup* group);
+  // As it was written, unproven or lost.
   void lookAtRow(std::int64_t id, const EventGroup* group);
+  // The ids after the last group, up to the last that was given.
   [[nodiscard]] Status finish();
+  // Told apart by whether the recorder has noted it.
   void lose(std::int64_t first, std::int64_t end);
 
   Connection& connection_;
+  // Groups from an id on, and rows between two ids.
   Statement groups_;
   Statement rows_;
+  // That is looked at.
   EventGroup group_;
+  // Where goOn() goes on. Every id from the file's first up to here was looked at.
   std::int64_t next_ = 0;  // the id that must come next
   bool done_ = true;
   bool tolerant_ = false;
+  // Bounds what is passed over of a file whose last id is damage.
   int stridesLeft_ = 0;
   std::int64_t good_ = 0;
   std::vector<IdRange> unproven_;

@@ -26,41 +26,52 @@ struct Facilities;
 class WorkQueue;
 }  // namespace platform
 
+// There is one at a time, between the installation of facilities and the next one. Installing and taking away happen
+// while no other thread uses the system, so the pointer to it needs no lock.
 class ProcessState {
  public:
+  // The facilities are the installer's and outlive this.
   explicit ProcessState(const platform::Facilities& installed) : facilities(installed) {}
   ProcessState(const ProcessState&) = delete;
   ProcessState& operator=(const ProcessState&) = delete;
 
-  // What the installation owns; ends the process when there is none.
+  // What the installation owns; ends the process when there is none. A line on standard error tells why, since there is
+  // no log then.
   static ProcessState& current() noexcept;
-  // The process's one T.
+  // The process's one T. T has a constructor without arguments. A search through the handful of types that there are,
+  // under the lock; who asks often keeps the pointer.
   template <class T>
   static std::shared_ptr<T> of() {
     return std::static_pointer_cast<T>(
         current().find(&kTag<T>, []() -> std::shared_ptr<void> { return std::make_shared<T>(); }));
   }
 
-  // Drops everything below and the states. The installation calls it while it still stands.
+  // Drops everything below and the states. The installation calls it while it still stands. The server queue goes
+  // first, as what it still holds may ask for states; the end of one state may make another, so this goes on until none
+  // is left.
   void clear();
 
   const platform::Facilities& facilities;
-  // TarnReportingUtility's, which are asked for with every request.
+  // TarnReportingUtility's, which are asked for with every request. The answer and the queue stand open here because a
+  // request asks for each several times: through find() that would be a lock and a search.
   std::once_flag internalBuildOnce;
   bool internalBuild = false;
   std::once_flag serverQueueOnce;
   std::shared_ptr<platform::WorkQueue> serverQueue;
 
  private:
-  // Its address tells the type.
+  // Its address tells the type. One a type, without run-time type information.
   template <class T>
   static constexpr char kTag = 0;
 
+  // A type's tag and its state.
   struct Entry {
     const void* tag;
     std::shared_ptr<void> state;
   };
 
+  // Makes the state under the lock when there is none. takeLast() gives the newest out of the list, null at its end: it
+  // is destroyed by the caller, outside the lock.
   std::shared_ptr<void> find(const void* tag, std::shared_ptr<void> (*make)());
   std::shared_ptr<void> takeLast();
 

@@ -33,7 +33,8 @@ namespace tarn {
 using platform::LogLevel;
 
 // Texts hold what clients send. One that is longer is cut and tells so, or a client could have megabytes written with
-// each of its requests.
+// each of its requests. Bytes of a line with its prefix. The cut is between two characters, and " ... (N more bytes)"
+// follows it.
 inline constexpr std::size_t kTarnReportingMostLogBytes = 65536;
 
 // The text of a log line together with the line where it stands.
@@ -53,11 +54,15 @@ namespace detail {
 // NOLINTNEXTLINE(cppcoreguidelines-avoid-non-const-global-variables)
 extern const platform::Log* installedLog;
 
+// False while no log is installed.
 inline bool logEnabled(LogLevel level) noexcept {
   return installedLog != nullptr && level >= installedLog->threshold();
 }
+// Forms the line and hands it to the installed log. A conversion without an argument prints "(null)", further arguments
+// are left out, and an unknown conversion stays as it is written. Out of line, so that a call site is small.
 void logWrite(const platform::LogCategory& category, LogLevel level, std::string_view module, const LogText& text,
               std::initializer_list<LogArgument> arguments);
+// The line in the place of one that there was no memory for.
 void logShortage(const platform::LogCategory& category, LogLevel level, std::string_view module, int line) noexcept;
 
 // What an argument is turned into before it is looked at: a callable into its result, everything else into itself.
@@ -72,6 +77,9 @@ decltype(auto) logValue(const Argument& argument) {
 
 }  // namespace detail
 
+// For the few places that are given their category by a caller; a module has its logger. Arguments are looked at while
+// the call lasts, and the text reaches the log before it returns. The level is that of the installed log: without one,
+// nothing is written.
 template <class... Arguments>
 void TarnReportingLog(const platform::LogCategory& category, LogLevel level, std::string_view module,
                       const LogText& text, const Arguments&... arguments) {
@@ -84,13 +92,17 @@ void TarnReportingLog(const platform::LogCategory& category, LogLevel level, std
   }
 }
 
-// The log of one module. A module without a name is for the few lines that carry no prefix.
+// The log of one module. A module without a name is for the few lines that carry no prefix. A constant of the source
+// file, without state: two pointers and a length.
 class TarnReportingLogger {
  public:
+  // A function and not a category, so that a logger is a constant expression.
   using Category = const platform::LogCategory& (*)();
 
+  // `module` is the name in the prefix and must be static.
   constexpr TarnReportingLogger(Category category, std::string_view module) : category_(category), module_(module) {}
 
+  // Writes a line. The text is a constant, so its line number is that of the call.
   template <class... Arguments>
   void operator()(LogLevel level, const LogText& text, const Arguments&... arguments) const {
     if (detail::logEnabled(level)) [[unlikely]] {
@@ -103,7 +115,10 @@ class TarnReportingLogger {
   std::string_view module_;
 };
 
-// The log categories, all under the subsystem "sys.oxbow.tarnkit".
+// The log categories, all under the subsystem "sys.oxbow.tarnkit". Each is static and has a short code by which readers
+// of the log filter, from the first on: tarnrc (clients), tarnrs (the service), tarnrr (sessions and most workers),
+// tarnri (rtc), tarnrd (drivers), tarnrt (traces), tarnrp (wattlog), tarnra (pylon), tarnrb (snare), tarnru
+// (summaries), tarnrl (DP), tarnrz (audio registration).
 const platform::LogCategory& TarnReportingClientCategory();
 const platform::LogCategory& TarnReportingServiceDelegateCategory();
 const platform::LogCategory& TarnReportingSessionCategory();

@@ -4,7 +4,8 @@
 namespace tarn {
 
 // Ends the process when the caller doesn't run as work of the server queue: what it is about to touch is guarded by
-// nothing else.
+// nothing else. Writes a line to standard error first. Also in release builds: a race there would corrupt what all
+// clients share.
 void TarnReportingRequireServerQueue() noexcept;
 // Whether the caller runs so: for an assertion where every message passes and the check would be felt.
 bool TarnReportingIsOnServerQueue() noexcept;

@@ -31,12 +31,16 @@ struct OpenSignpost {
   platform::Signpost signpost;
   std::chrono::nanoseconds began;
 };
+// Only while the switch is on, which only an installed facility has.
 std::optional<OpenSignpost> beginSignpost(const platform::Signpost& signpost) noexcept;
 
 }  // namespace detail
 
+// Lives on the stack and is never moved. An interval that began while nothing recorded leaves no trace, and the
+// facility drops one whose trace has ended meanwhile.
 class [[nodiscard]] TarnReportingSignpost {
  public:
+  // Relaxed: a trace that starts right now may miss the intervals that begin in that instant, and loses nothing else.
   TarnReportingSignpost(SignpostCategory category, std::string_view subject, std::string_view verb,
                         platform::SignpostArgument argument = {}) noexcept {
     if (detail::signpostSwitch->load(std::memory_order_relaxed)) [[unlikely]] {

@@ -1,6 +1,10 @@
 // The vocabulary: categories, types and service types of messages and sessions, their values and their strings.
 //
 // All of it is stateless. The string tables are built once, on first use; lookups take no lock. Threads: any.
+//
+// The printers and the parsers aren't inverses of each other: what clients send and what back-ends got from the
+// beginning stays as it is, and each exception is told below. Any number may come from a client, so the enumerations
+// hold numbers without a name too; nothing here fails.
 #pragma once
 
 #include <cstdint>
@@ -9,7 +13,9 @@
 
 namespace tarn {
 
-// Low 16 bits: the category proper; high 16 bits: an optional domain flag.
+// Low 16 bits: the category proper; high 16 bits: an optional domain flag. Only the six flags below are domains, each
+// alone: a high half with two of them has no name. A message with a flag is of another category than the same one
+// without.
 enum class AudioEventCategory : std::uint32_t {
   Undefined = 0,
   Generic = 1,
@@ -39,6 +45,7 @@ enum class AudioEventCategory : std::uint32_t {
   Unknown = 0xFFFFFFFF,
 };
 
+// With the category it tells what a message says; a session's log finds its latest message by the pair.
 enum class AudioEventType : std::uint16_t {
   Generic = 0,
   Start = 1,
@@ -63,6 +70,7 @@ enum class AudioEventType : std::uint16_t {
   Unknown = 65535,
 };
 
+// The type of a session decides which worker classes are made for it when it starts.
 enum class AudioServiceType : std::uint16_t {
   Generic = 0,
   Wisp = 1,
@@ -82,26 +90,32 @@ enum class AudioServiceType : std::uint16_t {
 };
 
 // "Playback" for 4, "DSP_Playback" for 0x10000004, "_Input" for an unknown domain over 3, "Undefined" for no category.
+// Unknown has no domain and prints as "Undefined" too.
 std::string TarnReportingUtilityCategoryString(AudioEventCategory category);
 // The value of a plain category name. "Tessels", "Undefined" and domain-prefixed names are not known here and yield
-// Unknown, although the printer writes them.
+// Unknown, although the printer writes them. The whole text, with its case; "Unknown" gives Unknown as well.
 AudioEventCategory TarnReportingUtilityCategoryFromString(std::string_view string);
 
 // "Generic" for every value without a name of its own, "Unknown" for 65535. The text is static.
 std::string_view TarnReportingUtilityTypeString(AudioEventType type);
-// Generic for every text that is not known; "MemoryLog" is not known here.
+// Generic for every text that is not known; "MemoryLog" is not known here. The whole text, with its case; "Unknown"
+// gives Unknown.
 AudioEventType TarnReportingUtilityTypeFromString(std::string_view string);
 
-// "unknown" for every value without a name. The text is static.
+// "unknown" for every value without a name. The text is static. Names are in lower case: "longformaudio" for 7.
 std::string_view TarnReportingUtilityGenerateServiceNameFromServiceType(AudioServiceType serviceType);
+// Unknown for every other text; case counts.
 AudioServiceType TarnReportingUtilityGenerateServiceTypeFromServiceName(std::string_view name);
 
-// Whether the category carries anything in its high half and is not Unknown.
+// Whether the category carries anything in its high half and is not Unknown. It doesn't matter whether the high half is
+// a domain with a name.
 bool TarnReportingUtilityIsABTestModeOn(AudioEventCategory category);
+// Always true: the one place where messages could be held back on a whole device.
 bool TarnReportingUtilityShouldSendMessage();
 // A session's ID is its reporter ID.
 std::int64_t TarnReportingUtilityExtractSessionIDFromReporterID(std::int64_t reporterID);
-// Seconds that playback must last to count: 0.5 for every service type.
+// Seconds that playback must last to count: 0.5 for every service type. Segments that are no longer than this are left
+// out of what the volume, input and lagoon workers derive.
 double TarnReportingUtilityVolumeMinimumPlayingTime(AudioServiceType serviceType);
 
 }  // namespace tarn

@@ -23,8 +23,10 @@ class TarnReportingRegistrationState;
 class TarnReportingSession;
 class TarnReportingSessionMessage;
 
+// For one publication. The back-end's session ends when this goes.
 class TarnReportingRegistrationPublication : public std::enable_shared_from_this<TarnReportingRegistrationPublication> {
  public:
+  // `records`: a message of the category Tessels and the type Summary each.
   TarnReportingRegistrationPublication(std::shared_ptr<TarnReportingRegistrationState> state,
                                        std::vector<plist::Dictionary> records);
   ~TarnReportingRegistrationPublication();
@@ -32,7 +34,8 @@ class TarnReportingRegistrationPublication : public std::enable_shared_from_this
   TarnReportingRegistrationPublication& operator=(const TarnReportingRegistrationPublication&) = delete;
 
   // Opens the back-end session under the token and has it look for backends. Nothing comes of it when there is no
-  // session to be had.
+  // session to be had. Once. The session is looked at only during the call. When no backend is found an error line
+  // tells so, and the next publication stays where it was put.
   void begin(const TarnReportingSession& session, const std::string& hierarchyToken);
   // Whether backends were found.
   bool started() const noexcept { return started_; }
@@ -46,6 +49,7 @@ class TarnReportingRegistrationPublication : public std::enable_shared_from_this
   }
 
  private:
+  // In their order, on the back-end's thread.
   void sendRecords();
 
   const std::shared_ptr<TarnReportingRegistrationState> state_;

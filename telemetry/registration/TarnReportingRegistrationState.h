@@ -19,6 +19,7 @@
 
 namespace tarn {
 
+// A moment that can't be stored has an error line and is good for this process still.
 class TarnReportingRegistrationState {
  public:
   // The state of this process.
@@ -29,13 +30,16 @@ class TarnReportingRegistrationState {
   // Enumerates with the accessory reader, which is made by the first call. What it finds becomes the info, and is
   // stored; the error of an enumeration that failed leaves the info as it was.
   Status enumerate();
+  // For people who look into the defaults of a device.
   void storeRegistrationInfo() const;
 
-  // Epoch seconds; 0 when it was never set. Loaded on first use.
+  // Epoch seconds; 0 when it was never set. Loaded on first use. When a publication is due, and when the accessories
+  // may be enumerated again.
   double nextInvocationEpoch();
   double enumerationCheckEpoch();
   // Sets and stores.
   void scheduleNextInvocation(double epochSeconds);
+  // The same for the next enumeration.
   void scheduleEnumerationCheck(double epochSeconds);
   // Sets alone.
   void setEnumerationCheckEpoch(double epochSeconds) noexcept { enumerationCheckEpoch_ = epochSeconds; }

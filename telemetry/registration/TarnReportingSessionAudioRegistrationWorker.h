@@ -26,6 +26,7 @@ namespace tarn {
 class TarnReportingRegistrationPublication;
 class TarnReportingRegistrationState;
 
+// Its class is in the table, so that switching it on takes one place.
 class TarnReportingSessionAudioRegistrationWorker : public TarnReportingSessionWorkerProtocol,
                                                     public TarnReportingSessionWorkerConsumerProtocol {
  public:
@@ -34,15 +35,23 @@ class TarnReportingSessionAudioRegistrationWorker : public TarnReportingSessionW
   // Nothing, for every session.
   static std::unique_ptr<TarnReportingSessionAudioRegistrationWorker> initWithSession(
       const std::shared_ptr<TarnReportingSession>& session);
+  // The state is the process's shared() but in tests.
   TarnReportingSessionAudioRegistrationWorker(std::weak_ptr<TarnReportingSession> session,
                                               std::shared_ptr<TarnReportingRegistrationState> state);
   ~TarnReportingSessionAudioRegistrationWorker() override;
 
+  // True.
   bool start();
+  // Without an enumeration that found accessories nothing happens. When no moment was ever set, one within the next
+  // week is drawn and stored. When it has passed, it is put off by a day first, so that a failure isn't repeated at
+  // each stop; then the accessories that were connected within the last eight days are published, which puts it off by
+  // a week. Without any such accessory it is put off by a week too.
   void stop();
+  // An enumeration that fails is tried again after a day, one that went well after a minute at the earliest.
   void handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) override;
 
   // Opens a back-end session of the registration's own and sends the records through it once a backend is found.
+  // Nothing without the session, the service or a token of it; the last two are told with an error line.
   void setupRTCReporterInterface(std::vector<plist::Dictionary> records);
   // Whether the last publication found backends.
   bool rtcReportingSessionStarted() const noexcept;
@@ -58,8 +67,11 @@ class TarnReportingSessionAudioRegistrationWorker : public TarnReportingSessionW
   // NOLINTEND(readability-identifier-naming)
 
  private:
+  // One enumeration, and when the next may be.
   void enumerate();
+  // What a stop does when a publication is due; `now` in epoch seconds.
   void publish(double now);
+  // With the work week in place of the moment.
   std::vector<plist::Dictionary> recentRecords(double now) const;
 
   const std::shared_ptr<TarnReportingRegistrationState> state_;

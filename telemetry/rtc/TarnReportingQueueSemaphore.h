@@ -16,6 +16,7 @@
 
 namespace tarn {
 
+// For one waiter at a time.
 class TarnReportingQueueSemaphore {
  public:
   // Whether a signal came in time.
@@ -25,12 +26,15 @@ class TarnReportingQueueSemaphore {
   TarnReportingQueueSemaphore(const TarnReportingQueueSemaphore&) = delete;
   TarnReportingQueueSemaphore& operator=(const TarnReportingQueueSemaphore&) = delete;
 
+  // Counts: two signals serve two waits.
   void signal();
   // By work of `queue`, as the last thing it does. `then` runs on the queue, ahead of all that waits there: at once
-  // when there is a signal, else when one comes or `longest` has passed.
+  // when there is a signal, else when one comes or `longest` has passed. A signal that comes while the time runs out
+  // counts as one in time.
   void wait(const std::shared_ptr<platform::SuspendableQueue>& queue, std::chrono::nanoseconds longest, Then then);
 
  private:
+  // Ends the waiting, and takes a signal if there is one.
   bool take();
 
   Mutex mutex_;

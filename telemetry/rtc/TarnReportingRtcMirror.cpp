@@ -78,7 +78,8 @@ const std::shared_ptr<platform::SuspendableQueue>& TarnReportingRtcMirror::rtcRe
 
 void TarnReportingRtcMirror::start(const Started& session) {
   const bool asked = open(session);
-  starting_ = false;
+  isInert_ = !asked;
+  --startsAhead_;
   if (asked) {
     kLog(LogLevel::Default, "waiting to find backends");
     rtcreportingBackendSemaphore_.wait(rtcReportingQueue_, kBackendWait,
@@ -120,18 +121,24 @@ void TarnReportingRtcMirror::foundBackends(const Backends& backends) {
 void TarnReportingRtcMirror::endWait(bool signalled) {
   if (!signalled) {
     kLog(LogLevel::Default, "timed out waiting for backends");
+    isInert_ = true;
     release();
   } else if (rtcReportingSessionStarted_) {
     kLog(LogLevel::Default, "continuing with backends!");
   } else {
     kLog(LogLevel::Default, "failed to find backend");
+    isInert_ = true;
     release();
   }
 }
 
+void TarnReportingRtcMirror::tellNeverStarted(std::string_view operation) {
+  kLog(LogLevel::Default, "Session never started. %s", operation);
+}
+
 void TarnReportingRtcMirror::handleMessage(const MessagePointer& message) {
   if (!rtcReportingSessionStarted_) {
-    kLog(LogLevel::Default, "Session never started. %s", "handleMessage");
+    tellNeverStarted("handleMessage");
     return;
   }
   _sendMessage(message);
@@ -140,7 +147,7 @@ void TarnReportingRtcMirror::handleMessage(const MessagePointer& message) {
 void TarnReportingRtcMirror::stop(const Stopped& session) {
   constexpr std::string_view kOperation = "stop";
   if (!rtcReportingSessionStarted_) {
-    kLog(LogLevel::Default, "Session never started. %s", kOperation);
+    tellNeverStarted(kOperation);
     return;
   }
   if (session.hadMessages) {

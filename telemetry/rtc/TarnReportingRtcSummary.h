@@ -24,11 +24,13 @@ struct TarnReportingRtcSummary {
   // are added. As JSON a byte may become six, and what stands in for the service takes no text of a gigabyte.
   static constexpr std::size_t kLongestText = std::size_t{128} << 20U;
 
+  // "Tarn_Session_Summary_Event" is the number of the service type; every other value is the text of a list with
+  // commas.
   plist::Dictionary payload;
   bool complete = true;  // false: the limit was reached
 };
 
-// Whether the Rtc worker is among those that the message is for.
+// Whether the Rtc worker is among those that the message is for. One without destinations is for everyone.
 bool TarnReportingIsAddressedToRtc(const TarnReportingSessionMessage& message);
 
 // The messages of a session that was stopped: those of the pages, of which not all need be for the worker, then the
@@ -38,7 +40,9 @@ struct TarnReportingRtcMessages {
   std::vector<std::shared_ptr<TarnReportingSessionMessage>> messages;
 };
 
-// Redundant messages and those that came while the session was not started are left out.
+// Redundant messages and those that came while the session was not started are left out. A page that can't be read back
+// adds nothing. The limit is looked at between two messages, so the last one may exceed it. Linear in the values; the
+// pages' messages are in memory one page at a time.
 TarnReportingRtcSummary TarnReportingMakeRtcSummary(AudioServiceType serviceType,
                                                     const TarnReportingRtcMessages& stopped,
                                                     std::size_t longestText = TarnReportingRtcSummary::kLongestText);

@@ -85,6 +85,10 @@ bool TarnReportingSessionRtcWorker::start() {
 }
 
 void TarnReportingSessionRtcWorker::handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) {
+  if (mirror_->isInert()) {
+    TarnReportingRtcMirror::tellNeverStarted("handleMessage");  // as its queue would, without the way there
+    return;
+  }
   auto copy = std::make_shared<TarnReportingSessionMessage>(message->message(), message->category(), message->type());
   rtcReportingQueue()->async([mirror = mirror_, copy = std::move(copy)] { mirror->handleMessage(copy); });
 }

@@ -20,6 +20,7 @@ namespace tarn {
 
 class TarnReportingRtcMirror;
 
+// Owner: the session. Threads: the server queue, but for what says otherwise.
 class TarnReportingSessionRtcWorker : public TarnReportingSessionWorkerProtocol,
                                       public TarnReportingSessionWorkerConsumerProtocol {
  public:
@@ -29,6 +30,7 @@ class TarnReportingSessionRtcWorker : public TarnReportingSessionWorkerProtocol,
   static std::unique_ptr<TarnReportingSessionRtcWorker> initWithSession(
       const std::shared_ptr<TarnReportingSession>& session);
   static bool handleSingleMessageSession() { return true; }
+  // The mirror is the worker's own; tests look at it.
   TarnReportingSessionRtcWorker(std::weak_ptr<TarnReportingSession> session,
                                 std::shared_ptr<TarnReportingRtcMirror> mirror);
 
@@ -43,11 +45,16 @@ class TarnReportingSessionRtcWorker : public TarnReportingSessionWorkerProtocol,
   void setStarted(bool started) noexcept override;
   // Whether a session of the service can be used. Threads: any.
   bool getRTCReportingStartedState() const noexcept;
+  // The private queue, made on first use.
   const std::shared_ptr<platform::SuspendableQueue>& rtcReportingQueue();
 
   // True before the service's session exists.
   bool start();
+  // Captures the log as it is now, by sharing payloads, and hands it over. When a start hasn't asked for backends yet,
+  // it helps with that for up to 20 ms, so that a session that is stopped at once is still mirrored. Nothing when the
+  // session is gone.
   void stop();
+  // Hands over a record of its own with the payload of this moment; redundant messages don't come here.
   void handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) override;
   // For work of rtcReportingQueue(): sends the message. Outside internal builds the record loses its time stamp.
   // NOLINTNEXTLINE(readability-identifier-naming): its given name

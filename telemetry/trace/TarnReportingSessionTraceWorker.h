@@ -4,6 +4,11 @@
 //
 // start and stop block the server queue until the trace facility answers, up to 15 and 180 seconds. Whatever fails is
 // logged, and the session ends as usual.
+//
+// The kind of the trace and the names of the files come from the session's configuration
+// (TarnReportingTraceConfiguration.h).
+//
+// Owner: the session. Threads: the server queue.
 #pragma once
 
 #include <memory>
@@ -16,6 +21,7 @@ namespace tarn {
 
 class TarnReportingTraceRecording;
 
+// Neither consumer nor producer: it starts after those and stops after them, so that their stop is in the trace.
 class TarnReportingSessionTraceWorker : public TarnReportingSessionWorkerProtocol {
  public:
   static constexpr std::string_view kClassName = "TarnReportingSessionTraceWorker";
@@ -24,13 +30,19 @@ class TarnReportingSessionTraceWorker : public TarnReportingSessionWorkerProtoco
   // internal build it does nothing.
   static std::unique_ptr<TarnReportingSessionTraceWorker> initWithSession(
       const std::shared_ptr<TarnReportingSession>& session);
+  // For whoever lists workers; the session doesn't ask.
   static bool internalOnly() { return true; }
 
+  // `perfDataName`: what the result file calls its measurements; the configured name of the file, or "TarnReporting".
   TarnReportingSessionTraceWorker(std::weak_ptr<TarnReportingSession> session, std::string perfDataName);
   // A trace that still runs ends with its session.
   ~TarnReportingSessionTraceWorker() override;
 
+  // Whether a trace runs, or was asked for and the facility said something about it, be it an error. Without the file
+  // of probe descriptions no trace is begun, and an error line tells so.
   bool start();
+  // Nothing without a trace. The results are made on the queue too, as an announced block: the watchdog bears it, and
+  // the main loop stands still until the file is written.
   void stop();
 
  private:

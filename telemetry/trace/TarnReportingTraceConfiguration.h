@@ -9,8 +9,10 @@ namespace tarn {
 
 // A property-list file that describes the probes; a session without it isn't traced.
 inline constexpr std::string_view kProbeDescriptionsKey = "TarnReportingSkeinPlistFilePath";
+// "sktrace_profile" asks for the template 3, every other value and none for 2.
 inline constexpr std::string_view kTraceTypeKey = "TarnReportingTraceType";
-// The result file.
+// The result file. Its name and its folder. Without a name it is called by date, application and service; without a
+// folder it lies in "Audio/Traces" of the diagnostic logs.
 inline constexpr std::string_view kOutputFileNameKey = "TarnReportingSkeinOutputFileName";
 inline constexpr std::string_view kOutputFileDirectoryKey = "TarnReportingSkeinOutputFileDirectory";
 

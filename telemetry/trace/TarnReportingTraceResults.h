@@ -30,6 +30,8 @@ namespace tarn {
 
 class TarnReportingSession;
 
+// Measurements are streamed to the writer as they are found; what grows with the trace are its intervals in memory, and
+// a name for each kind of them.
 class TarnReportingTraceResults {
  public:
   // Looks at the session; it must outlive this object. `eventsLeftOut` are those that the trace lacks.
@@ -38,16 +40,23 @@ class TarnReportingTraceResults {
   TarnReportingTraceResults& operator=(const TarnReportingTraceResults&) = delete;
 
   // Analyses the trace and writes the file. The process ends here when the analysis library lacks a class. Every other
-  // failure is logged and ends the processing.
+  // failure is logged and ends the processing. Once. Nothing is written without a trace, probe descriptions, a model or
+  // a writer; without signposts the probes' values are written all the same.
   void processTraceSkein(const std::optional<std::string>& tracePath);
 
  private:
-  // Whether there is a writer; names the files.
+  // Whether there is a writer; names the files. Makes the folder too; a failure there shows when the file is moved.
   bool createPDWriter();
+  // Intervals of the subsystems whose names hold "sys.oxbow.audio" or "sys.oxbow.tarnkit": each value in the order of
+  // the trace, then the sums by the order in which names came.
   void processSignposts(platform::TraceModel& trace);
+  // Goes through the children first; a probe that measures no intervals adds nothing itself.
   void processProbe(const platform::TraceProbe& probe);
+  // The sums of the probe that had the last event, which no follower has written.
   void writeLastProbe();
+  // The names of the measurements, the data base that they are meant for, and how many events are missing.
   void writeExtensions();
+  // A file that can't be closed stays under its temporary name.
   void closeAndMove();
 
   void writeValue(std::string_view name, double milliseconds);
@@ -64,7 +73,8 @@ class TarnReportingTraceResults {
   std::optional<std::string> currentProbe_;
   double totalTimeValue_ = 0;  // in milliseconds
   std::size_t totalTimeMetrics_ = 0;
-  // Each once, in the order in which they came.
+  // Each once, in the order in which they came. The names that readers of the file look for. The set tells which ones
+  // are there already.
   std::vector<std::string> keyVariables_;
   std::unordered_set<std::string> knownKeyVariables_;
 };

@@ -4,10 +4,11 @@ import errno
 import mmap
 import os
 import struct
+from collections import Counter
 
 WORDS = 64
 (FAULT_KIND, FAULT_ORDINAL, FAULT_ACTION, FIRED, STICKY_KINDS, STICKY_ERROR, FAILING_ALLOCATION, ALLOCATIONS,
- CLOCK_OFFSET, SEQUENCE, SYNC_DELAY, DELAYS, FAILURES_IN_A_ROW) = range(13)
+ CLOCK_OFFSET, SEQUENCE, SYNC_DELAY, DELAYS, FAULT_SITE, SITE_CALLS, FAILURES_IN_A_ROW) = range(15)
 FIRST_COUNTER = 16
 SHORT = 65536
 COUNT_ONLY = (1 << 64) - 1
@@ -36,6 +37,7 @@ KINDS = {
     "socket": ("EMFILE", "ENOMEM"),
 }
 NUMBERS = {kind: number for number, kind in enumerate(KINDS)}
+SITES_VARIABLE = "TARN_SHIM_SITES"
 
 
 class Control:
@@ -64,6 +66,11 @@ class Control:
         self[FAULT_ORDINAL] = ordinal
         self[FAULT_KIND] = NUMBERS[kind] + 1
 
+    def let_fail_at(self, kind, site, ordinal, how):
+        """The same, counted among the calls from one site."""
+        self[FAULT_SITE] = site
+        self.let_fail(kind, ordinal, how)
+
     def let_all_fail(self, kinds, how):
         self[STICKY_ERROR] = getattr(errno, how)
         self[STICKY_KINDS] = sum(1 << NUMBERS[kind] for kind in kinds)
@@ -73,6 +80,13 @@ class Control:
 
     def calls(self):
         return {kind: self[FIRST_COUNTER + number] for kind, number in NUMBERS.items()}
+
+
+def sites_in(path):
+    """How many calls of each (kind, site) a program made that was given this file."""
+    kinds = list(KINDS)
+    with open(path, "rb") as file:
+        return Counter((kinds[kind], site) for kind, site in struct.iter_unpack("<QQ", file.read()))
 
 
 def shim(folder, name):

@@ -5,7 +5,8 @@ import time
 from account import Sender, Watcher, judge, rows_after
 from service import settled
 
-ROUNDS_A_STORE = 10
+# Each start reads the store through, so a large one costs kills.
+ROUNDS_A_STORE = 5
 
 
 def no_figures():
@@ -38,7 +39,7 @@ def one_kill(context, figures, service, keys, row):
     watcher = Watcher(service, row)
     for thread in (watcher, *senders):
         thread.start()
-    time.sleep(context.random.uniform(0.02, 0.6))
+    time.sleep(context.random.uniform(0.02, 0.5))
     ended = time.monotonic()
     service.kill()
     for thread in (*senders, watcher):

@@ -91,11 +91,17 @@ class Service:
 
     def ends_within(self, seconds):
         """Whether it ends by itself in that time; one that dies closes its sockets some moments before."""
+        if self.process.poll() is not None:
+            return True
+        # Popen.wait() would look again each 50 ms.
+        file = os.pidfd_open(self.process.pid)
         try:
-            self.process.wait(seconds)
-        except subprocess.TimeoutExpired:
-            return False
-        return True
+            ending = select.poll()
+            ending.register(file, select.POLLIN)
+            ended = bool(ending.poll(seconds * 1000))
+        finally:
+            os.close(file)
+        return ended and self.process.wait() is not None
 
     def comes_to_rest(self, progress, patience=PATIENCE):
         """Waits until all its threads sleep, longer than any does between two parts of one work. Whether they do, or
@@ -132,11 +138,10 @@ class Service:
     def stop(self, number=signal.SIGTERM, patience=PATIENCE):
         """Its exit status (negative: the signal that ended it), None when it had to be killed at the deadline."""
         self.process.send_signal(number)
-        try:
-            return self.process.wait(patience)
-        except subprocess.TimeoutExpired:
-            self.kill()
-            return None
+        if self.ends_within(patience):
+            return self.process.returncode
+        self.kill()
+        return None
 
     def log_text(self):
         try:

@@ -3,11 +3,19 @@
 The script runs over a store that holds messages already. However the service takes the fault (it may refuse to start,
 close a connection, refuse a request or end, each with a line), what was answered is in the store once afterwards, what
 was there before is still there, and the next start serves.
+
+A call is known by its site: its kind and the eight callers above it, as runs without a fault show them. Calls of one
+site do the same, so of each the first, the middle and the last fail, in each way in which that kind of call may: that
+is all. A site that a run doesn't reach, as threads take turns otherwise, is tried and not `fired`. A trial mostly
+waits, for a store that tries again or for a peer, so some run side by side. PART is a share of the sites, as 2of5.
 """
 
 import os
+import re
 import shutil
 import time
+from collections import Counter, deque
+from concurrent.futures import ThreadPoolExecutor
 
 import control
 import wire
@@ -16,6 +24,9 @@ from service import settled
 
 OLD, FIRST_NEW, SECOND_NEW = 1, 2, 3
 OLD_MESSAGES, NEW_MESSAGES = 40, 8
+RUNS_TO_LEARN = 3
+SIDE_BY_SIDE = 4
+COUNTED = ("tried", "fired", "refused_or_ended", "doubled", "committed_lost", "settled_lost", "late_lost", "set_aside")
 
 
 class Script:
@@ -85,13 +96,29 @@ def old_store(context):
 
 
 class Trials:
-    def __init__(self, context, figures):
-        self.context, self.figures = context, figures
-        self.old = old_store(context)
+    """One trial after the other, from the same old store, with figures of its own."""
+
+    def __init__(self, context, old):
+        self.context, self.old = context, old
+        self.figures = Counter()
         self.control = context.new_control()
         self.environment = self.control.environment(context.shim("faults"))
         self.service = context.new_service()
         self.calls = {}
+        self.sites = os.path.join(context.new_folder(), "sites")
+
+    def learn(self):
+        """How often each site calls, at the most, in some runs without a fault."""
+        counts = Counter()
+        environment = self.environment
+        self.environment = {**environment, control.SITES_VARIABLE: self.sites}
+        for _ in range(RUNS_TO_LEARN):
+            if problem := self.one():
+                raise RuntimeError(f"the script fails without a fault: {problem}")
+            counts |= control.sites_in(self.sites)
+            os.unlink(self.sites)
+        self.environment = environment
+        return counts
 
     def one(self, fault=None):
         """A run with one fault; what went wrong, or nothing."""
@@ -100,7 +127,7 @@ class Trials:
         self.service.forget_log()
         self.control.forget()
         if fault is not None:
-            self.control.let_fail(*fault)
+            self.control.let_fail_at(*fault)
         script = Script(self.service)
         try:
             started = self.service.start(self.environment, patience=15)
@@ -111,6 +138,19 @@ class Trials:
         except TimeoutError as problem:
             return str(problem)
         return self.verdict(script, status, ended_itself)
+
+    def all_of(self, faults):
+        """Takes faults until none is left, or no time; others take from the same."""
+        while self.context.left() > 0:
+            try:
+                fault = faults.popleft()
+            except IndexError:
+                return
+            problem = self.one(fault)
+            self.figures["tried"] += 1
+            if problem:
+                kind, site, ordinal, how = fault
+                self.context.fail(f"call {ordinal} of {kind} at {site:x} with {how}: {problem}")
 
     def verdict(self, script, status, ended_itself):
         line = self.service.log_text().strip()
@@ -153,29 +193,43 @@ class Trials:
         return None
 
 
-def faults_of(calls, random):
+def faults_of(sites, random):
     """All faults, by chance, but each kind of call in its turn: the rare ones matter as much as the frequent."""
+    by_kind = {kind: [] for kind in control.KINDS}
+    for (kind, site), count in sorted(sites.items()):
+        by_kind[kind] += [(kind, site, ordinal, how) for ordinal in sorted({1, (count + 1) // 2, count})
+                          for how in control.KINDS[kind]]
     turns = []
-    for kind, count in calls.items():
-        faults = [(kind, ordinal, how) for ordinal in range(1, count + 1) for how in control.KINDS[kind]]
+    for faults in by_kind.values():
         random.shuffle(faults)
         turns += enumerate(faults)
     return [fault for _, fault in sorted(turns, key=lambda turn: turn[0])]
 
 
+def share_of(sites, part):
+    """The sites of a part, "2of5"; of none, all."""
+    if not part:
+        return sites
+    match = re.fullmatch(r"(\d+)of(\d+)", part)
+    if match is None or not 0 < int(match[1]) <= int(match[2]):
+        raise ValueError(f"{part!r} is no share as 2of5")
+    # By what a site is, which is the same in each run. Sites are odd.
+    return {(kind, site): count for (kind, site), count in sites.items()
+            if site // 2 % int(match[2]) == int(match[1]) - 1}
+
+
 def run(context, figures):
-    figures.update(tried=0, of=0, fired=0, refused_or_ended=0, doubled=0, committed_lost=0, settled_lost=0,
-                   late_lost=0, set_aside=0)
-    trials = Trials(context, figures)
-    if problem := trials.one():
-        raise RuntimeError(f"the script fails without a fault: {problem}")
-    figures["uncalled"] = ",".join(kind for kind, count in trials.calls.items() if count == 0) or "none"
-    faults = faults_of(trials.calls, context.random)
-    figures["of"] = len(faults)
-    for fault in faults:
-        if context.left() <= 0:
-            break
-        problem = trials.one(fault)
-        figures["tried"] += 1
-        if problem:
-            context.fail(f"call {fault[1]} of {fault[0]} with {fault[2]}: {problem}")
+    figures.update(tried=0, of=0)
+    old = old_store(context)
+    workers = [Trials(context, old) for _ in range(SIDE_BY_SIDE)]
+    sites = share_of(workers[0].learn(), context.only)
+    workers[0].figures.clear()
+    faults = faults_of(sites, context.random)
+    figures.update(of=len(faults), sites=len(sites), calls=sum(sites.values()))
+    figures["uncalled"] = ",".join(kind for kind, count in workers[0].calls.items() if count == 0) or "none"
+    waiting = deque(faults)
+    with ThreadPoolExecutor(len(workers)) as pool:
+        list(pool.map(lambda trials: trials.all_of(waiting), workers))
+    figures.update({name: sum(trials.figures[name] for trials in workers) for name in COUNTED})
+    if context.only:
+        context.tell_part(context.only, figures)

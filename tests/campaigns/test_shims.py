@@ -44,6 +44,15 @@ class Shims(unittest.TestCase):
         self.assertEqual(self.run_with("faults", READS), ["1000", "5", "1000", "1000"])
         self.assertEqual(self.page[control.FIRED], 1)
 
+    def test_fail_a_call_of_one_site(self):
+        path = os.path.join(self.folder, "sites")
+        self.run_with("faults", READS, TARN_SHIM_SITES=path)
+        sites = [site for (kind, site), count in control.sites_in(path).items() if kind == "read" and count == 4]
+        self.assertEqual(len(sites), 1)
+        self.page.let_fail_at("read", sites[0], 2, "EIO")
+        self.assertEqual(self.run_with("faults", READS), ["1000", "5", "1000", "1000"])
+        self.assertEqual((self.page[control.FIRED], self.page[control.SITE_CALLS]), (1, 4))
+
     def test_shorten_a_call(self):
         before = self.reads_before()
         self.page.let_fail("read", before + 3, "short")

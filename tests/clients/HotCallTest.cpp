@@ -7,6 +7,7 @@
 #include <unistd.h>
 
 #include <cstddef>
+#include <fstream>
 
 #include "tests/clients/LibraryFixture.h"
 #include "tests/host/InChild.h"
@@ -122,6 +123,30 @@ TEST_F(HotCall, MeetsNoPageFaultOnceWarm) {
   EXPECT_EQ(odd, 0);
   EXPECT_EQ(after.ru_minflt - before.ru_minflt, 0);
   EXPECT_EQ(after.ru_majflt - before.ru_majflt, 0);
+}
+
+// Of this process, in KiB.
+long residentKiB() {
+  std::ifstream file("/proc/self/statm");
+  long all = 0;
+  long resident = 0;
+  file >> all >> resident;
+  return resident * (::sysconf(_SC_PAGESIZE) / 1024);
+}
+
+TEST_F(HotCall, AClientAndItsWriterTakeLessMemoryThanTheHeaderSays) {
+  const int outcome = testing::inChild([this] {
+    constexpr long kClients = 16;
+    openAll("/nowhere/socket");
+    const long before = residentKiB();
+    for (long i = 0; i < kClients; ++i) {
+      openAll("/nowhere/socket");
+      postMany();
+    }
+    return static_cast<int>((residentKiB() - before) / kClients / 4);  // an exit status is small
+  });
+  EXPECT_GE(outcome, 256 / 4);  // the ring alone
+  EXPECT_LT(outcome, 512 / 4);
 }
 
 }  // namespace

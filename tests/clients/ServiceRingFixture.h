@@ -6,7 +6,7 @@
 #include <vector>
 
 #include "tests/clients/LibraryFixture.h"
-#include "tests/e2e/ServiceFixture.h"
+#include "tests/e2e/support/ServiceFixture.h"
 
 namespace tarn::reporting {
 

@@ -13,6 +13,9 @@ import tempfile
 import unittest
 
 BUILD, LIBDIR, SYMBOLS, CC, CXX = sys.argv[1:6]
+ABI = SYMBOLS.replace(".symbols.txt", ".abi")
+HEADERS = os.path.join(os.path.dirname(SYMBOLS), "include")
+ABI_OPTIONS = ("--exported-interfaces-only", "--drop-private-types")
 SOURCES = os.path.join(os.path.dirname(os.path.abspath(__file__)), "outside")
 
 
@@ -87,6 +90,27 @@ class InstalledLibrary(unittest.TestCase):
         with open(SYMBOLS, encoding="utf-8") as file:
             self.assertEqual(shown, file.read().split())
 
+    def test_its_interface_is_that_of_the_committed_file(self):
+        if shutil.which("abidiff") is None:
+            self.skipTest("there is no abidiff")
+        built = os.path.join(BUILD, "clients", "c", "libtarnreporting.so.1")  # installed, it may have lost its types
+        done = run("abidiff", *ABI_OPTIONS, "--headers-dir2", HEADERS, ABI, built)
+        self.assertEqual(done.returncode, 0, done.stdout + done.stderr + "\nWhere this is meant: abidw "
+                         f"{' '.join(ABI_OPTIONS)} --headers-dir clients/c/include --no-comp-dir-path --no-corpus-path"
+                         f" --no-show-locs {built} --out-file clients/c/tarnreporting.abi")
+
+    def test_a_change_of_the_interface_is_seen(self):
+        if shutil.which("abidiff") is None:
+            self.skipTest("there is no abidiff")
+        with open(ABI, encoding="utf-8") as file:
+            text = file.read()
+        narrow = re.search(r"type-id='([^']+)' name='timeout_ms'", text)[1]
+        changed = os.path.join(self.folder, "changed.abi")
+        with open(changed, "w", encoding="utf-8") as file:
+            file.write(re.sub(r"type-id='[^']+' name='stamp_ns'", f"type-id='{narrow}' name='stamp_ns'", text))
+        built = os.path.join(BUILD, "clients", "c", "libtarnreporting.so.1")
+        self.assertNotEqual(run("abidiff", *ABI_OPTIONS, "--headers-dir2", HEADERS, changed, built).returncode, 0)
+
     def test_nothing_runs_when_it_is_loaded(self):
         sections = run("readelf", "-WS", self.library).stdout
         # The compiler's own start file has one entry of eight bytes; a global constructor would be a second.
@@ -94,4 +118,4 @@ class InstalledLibrary(unittest.TestCase):
         self.assertEqual(int(size.group(1), 16), 8)
 
 
-unittest.main(argv=sys.argv[:1])
+unittest.main(argv=sys.argv[:1], verbosity=2)  # tells why one was skipped

@@ -1,7 +1,7 @@
 // What becomes of a client's sessions when its connection ends, and of everybody else's.
 #include <csignal>
 
-#include "tests/e2e/ServiceFixture.h"
+#include "tests/e2e/support/ServiceFixture.h"
 
 namespace tarn::e2e {
 namespace {

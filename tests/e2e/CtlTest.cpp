@@ -6,7 +6,7 @@
 #include <csignal>
 #include <fstream>
 
-#include "tests/e2e/ServiceFixture.h"
+#include "tests/e2e/support/ServiceFixture.h"
 
 namespace tarn::e2e {
 namespace {

@@ -1,7 +1,7 @@
 // The messages that the service derives when a session stops, from the client's script to the recorder's rows.
 #include <chrono>
 
-#include "tests/e2e/ServiceFixture.h"
+#include "tests/e2e/support/ServiceFixture.h"
 
 namespace tarn::e2e {
 namespace {

@@ -5,7 +5,7 @@
 #include <filesystem>
 #include <sstream>
 
-#include "tests/e2e/ServiceFixture.h"
+#include "tests/e2e/support/ServiceFixture.h"
 
 namespace tarn::e2e {
 namespace {

@@ -1,7 +1,7 @@
 // What drivers count in their channel files while a session runs, from the files to the recorder's rows.
 #include <filesystem>
 
-#include "tests/e2e/ServiceFixture.h"
+#include "tests/e2e/support/ServiceFixture.h"
 
 namespace tarn::e2e {
 namespace {

@@ -6,8 +6,8 @@
 #include <csignal>
 #include <sstream>
 
-#include "tests/e2e/RawSocket.h"
-#include "tests/e2e/ServiceFixture.h"
+#include "tests/e2e/support/RawSocket.h"
+#include "tests/e2e/support/ServiceFixture.h"
 
 namespace tarn::e2e {
 namespace {

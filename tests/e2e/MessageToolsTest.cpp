@@ -1,7 +1,7 @@
 // tarnreportingctl lint and explain: what is wrong in a script, and what a name or a key means.
 #include <filesystem>
 
-#include "tests/e2e/ServiceFixture.h"
+#include "tests/e2e/support/ServiceFixture.h"
 
 namespace tarn::e2e {
 namespace {

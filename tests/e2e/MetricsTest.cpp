@@ -1,7 +1,7 @@
 // Issue and haptics messages on their way through the real service into the metric service's and the power log's rows.
 #include <algorithm>
 
-#include "tests/e2e/ServiceFixture.h"
+#include "tests/e2e/support/ServiceFixture.h"
 
 namespace tarn::e2e {
 namespace {

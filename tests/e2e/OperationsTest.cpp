@@ -1,7 +1,7 @@
 // What a client sees and what the recorder gets, operation by operation.
 #include <algorithm>
 
-#include "tests/e2e/ServiceFixture.h"
+#include "tests/e2e/support/ServiceFixture.h"
 
 namespace tarn::e2e {
 namespace {

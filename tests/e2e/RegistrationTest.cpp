@@ -1,7 +1,7 @@
 // The accessory registration, which declines every session.
 #include <gtest/gtest.h>
 
-#include "tests/e2e/ServiceFixture.h"
+#include "tests/e2e/support/ServiceFixture.h"
 
 namespace tarn::e2e {
 namespace {

@@ -4,7 +4,7 @@
 #include <csignal>
 #include <set>
 
-#include "tests/e2e/ServiceFixture.h"
+#include "tests/e2e/support/ServiceFixture.h"
 
 namespace tarn::e2e {
 namespace {

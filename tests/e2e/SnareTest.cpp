@@ -2,7 +2,7 @@
 #include <csignal>
 #include <regex>
 
-#include "tests/e2e/ServiceFixture.h"
+#include "tests/e2e/support/ServiceFixture.h"
 
 namespace tarn::e2e {
 namespace {

@@ -8,8 +8,8 @@
 #include <algorithm>
 #include <cstring>
 
-#include "tests/e2e/RawSocket.h"
-#include "tests/e2e/ServiceFixture.h"
+#include "tests/e2e/support/RawSocket.h"
+#include "tests/e2e/support/ServiceFixture.h"
 
 namespace tarn::e2e {
 namespace {

@@ -4,8 +4,8 @@
 
 #include <span>
 
-#include "tests/e2e/RawSocket.h"
-#include "tests/e2e/ServiceFixture.h"
+#include "tests/e2e/support/RawSocket.h"
+#include "tests/e2e/support/ServiceFixture.h"
 #include "wire/ReplyDecoder.h"
 
 namespace tarn::e2e {

@@ -255,18 +255,20 @@ class Seeds(unittest.TestCase):
 
 class Sizes(unittest.TestCase):
     def test_files_at_their_limit_pass_and_one_line_more_does_not(self):
-        for path, limit in (("wire/A.h", 250), ("wire/A.cpp", 600), ("tests/wire/ATest.cpp", 800),
-                            ("tools/a.py", 400), ("dev", 400)):
+        for path, limit in (("wire/A.h", 250), ("client/include/tarnkit/A.h", 400), ("wire/A.cpp", 400),
+                            ("tests/wire/ATest.cpp", 800), ("tools/a.py", 400), ("dev", 400)):
             with self.subTest(path):
                 self.assertEqual(found(sizes, {path: "\n" * limit}), [])
                 self.assertEqual(found(sizes, {path: "\n" * (limit + 1)}), [(path, limit + 1)])
 
-    def test_many_long_sources_are_reported(self):
-        long = "\n" * 401
-        self.assertEqual(found(sizes, {"wire/A.cpp": long}), [])
-        self.assertEqual(len(found(sizes, {"wire/A.cpp": long, "wire/B.cpp": long})), 2)
-        few = {f"wire/S{i}.cpp": "\n" for i in range(38)}
-        self.assertEqual(found(sizes, {**few, "wire/A.cpp": long, "wire/B.cpp": long}), [])
+    def test_folder_of_too_many_units_is_reported_where_a_source_and_its_header_are_one(self):
+        full = {f"wire/U{number}{end}": "\n" for number in range(20) for end in (".cpp", ".h")}
+        self.assertEqual(found(sizes, full), [])
+        self.assertEqual(found(sizes, {**full, "wire/One.h": "\n"}), [("wire", 21)])
+        self.assertEqual(found(sizes, {**full, "wire/more/One.h": "\n", "wire/one.py": "\n"}), [])
+
+    def test_interfaces_may_be_many(self):
+        self.assertEqual(found(sizes, {f"platform/U{number}.h": "\n" for number in range(40)}), [])
 
     def test_wide_lines_of_texts_are_reported_but_tables_and_links_are_not(self):
         self.assertEqual(found(sizes, {"docs/a.md": "x" * 120 + "\n" + "y" * 121 + "\n"}), [("docs/a.md", 2)])

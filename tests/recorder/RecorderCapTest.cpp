@@ -1,9 +1,9 @@
 // The cap holds for all that the recorder keeps and for the folders that it is told of.
 #include <fcntl.h>
 
-#include "recorder/store/StateUsage.h"
-#include "tests/recorder/ChildProcess.h"
+#include "recorder/store/files/StateUsage.h"
 #include "tests/recorder/RecorderFixture.h"
+#include "tests/recorder/faults/ChildProcess.h"
 
 namespace tarn::recorder {
 namespace {

@@ -1,7 +1,7 @@
 // What a run that was killed had been handed and didn't commit is known to the next one, to the event.
-#include "tests/recorder/ChildProcess.h"
-#include "tests/recorder/FaultyFiles.h"
 #include "tests/recorder/RecorderFixture.h"
+#include "tests/recorder/faults/ChildProcess.h"
+#include "tests/recorder/faults/FaultyFiles.h"
 
 namespace tarn::recorder {
 namespace {

@@ -115,6 +115,13 @@ TEST_F(SingleMessageSession, IsStoppedAndNotJustDropped) {
   EXPECT_NE(use(), session);
 }
 
+TEST_F(SingleMessageSession, ItsStopIsTheLastCheck) {
+  use();
+  platform_.advance(6s);
+  EXPECT_EQ(platform_.log.count("Stopping singleMessageSession"), 1U);
+  EXPECT_FALSE(platform_.log.contains("Not stopping singleMessageSession"));
+}
+
 TEST_F(SingleMessageSession, HoldsOnlyTheWorkersThatAcceptIt) {
   EXPECT_EQ(workerNames(),
             (std::vector<std::string>{"TarnReportingSessionTallyWorker", "TarnReportingSessionWattlogWorker",

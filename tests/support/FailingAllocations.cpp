@@ -4,7 +4,7 @@
 #include <cerrno>
 #include <cstddef>
 
-#include "testing/OwnMemory.h"
+#include "testing/backends/OwnMemory.h"
 
 // The C library's own names for what is replaced here.
 // NOLINTBEGIN(bugprone-reserved-identifier,readability-identifier-naming)

@@ -1,6 +1,6 @@
 // FailingAllocations: lets allocations of the calling thread fail, by their number since it was made.
 //
-// What a fake keeps for itself (testing/OwnMemory.h) doesn't count and never fails.
+// What a fake keeps for itself (testing/backends/OwnMemory.h) doesn't count and never fails.
 //
 // A test program has what needs it by tarn_short_memory_tests(), and not under a sanitizer, whose allocator can't fail.
 #pragma once

@@ -15,7 +15,8 @@
 #endif
 
 #ifdef TARN_SANITIZED_HEAP
-#include <sanitizer/allocator_interface.h>
+// Of the sanitizers' runtime; g++ comes without the header that declares it.
+extern "C" std::size_t __sanitizer_get_current_allocated_bytes();
 #endif
 
 namespace tarn::testing {

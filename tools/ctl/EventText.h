@@ -7,11 +7,14 @@
 
 namespace tarn::ctl {
 
-// {"id", "time", "backend", "name", "payload", "detail"}.
+// {"id", "time", "backend", "name", "payload", "detail"}. The time is in epoch seconds; payload and detail are the
+// objects that were recorded. One line, whatever they hold.
 std::string eventJson(const recorder::EventRow& row);
 
-// A table's line; columns are aligned for names of usual length.
+// A table's line; columns are aligned for names of usual length. The time is in UTC with milliseconds, or epoch seconds
+// beyond the years 1970 to 9999. Texts are printable(); an empty detail is left out.
 std::string eventLine(const recorder::EventRow& row);
+// The line above those.
 std::string eventHeading();
 
 }  // namespace tarn::ctl

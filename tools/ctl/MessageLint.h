@@ -11,13 +11,15 @@
 
 namespace tarn::ctl {
 
+// Constant once made.
 class MessageLint {
  public:
   // `ownKeysAreFine`: a key that nobody reads is a finding only where it looks like one that somebody reads, or is one
   // that the service writes itself.
   explicit MessageLint(bool ownKeysAreFine) : ownKeysAreFine_(ownKeysAreFine) {}
 
-  // A sentence for each thing that is wrong, in the order of the step.
+  // A sentence for each thing that is wrong, in the order of the step. Only for lines that type a session, configure it
+  // or send a message; none for others. Keys are looked up as the intake makes them, with '_' for blanks.
   std::vector<std::string> findings(const script::ScriptStep& step) const;
 
  private:

@@ -18,6 +18,7 @@ inline constexpr int kWrongUsage = 64;   // the command line
 inline constexpr int kBadInput = 65;     // a script, a JSON text, a defaults file
 inline constexpr int kUnreachable = 69;  // no service listens on the socket, or the connection to it broke
 
+// Once a line failed, further ones are left out and the first failure is kept.
 class Output {
  public:
   // Writes to `fd`, which stays the caller's.
@@ -29,9 +30,10 @@ class Output {
   // added. False once anything could not be written.
   bool line(std::string_view text);
 
+  // Whether everything could be written so far. Who prints much looks at it between two lines.
   bool good() const noexcept { return failure_.ok(); }
   // The exit status that the output itself asks for: success while it is good, and when the reader simply left; else it
-  // complains and says failure.
+  // complains and says failure. Call it at the end, once: it complains each time.
   int status() const;
 
  private:
@@ -40,7 +42,7 @@ class Output {
   Status failure_;
 };
 
-// Writes "tarnreportingctl: TEXT" to stderr, printable().
+// Writes "tarnreportingctl: TEXT" to stderr, printable(). One line; what it says is a sentence without a full stop.
 void complain(std::string_view text);
 
 // Whether a place is named, by an option or by the environment; complains when not.

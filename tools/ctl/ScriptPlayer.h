@@ -25,50 +25,65 @@
 
 namespace tarn::ctl {
 
+// A reply is printed as {"client", "line", "op", "error", "result"}; one that carries an error is a reply like any
+// other and doesn't stop the script. Three things do: a bad line, a lost connection, an answer that is late.
 class ScriptPlayer {
  public:
-  // `scriptName` is the script's name in complaints.
+  // `scriptName` is the script's name in complaints. Connects to nothing yet. The output outlives the player.
   ScriptPlayer(ServiceAddress address, std::string scriptName, Output& output);
   ScriptPlayer(const ScriptPlayer&) = delete;
   ScriptPlayer& operator=(const ScriptPlayer&) = delete;
 
   // Plays what `fd` yields to its end and closes the connections. Returns the exit status; what stopped the script
-  // early was said on stderr.
+  // early was said on stderr. Once; the descriptor stays the caller's. Complaints begin with the script's name and the
+  // line's number. A script that killed the service waits up to 30 seconds for its end.
   int play(int fd);
 
  private:
   using Clock = std::chrono::steady_clock;
+  // What the script calls by a name. `lossReason` is empty while it stands.
   struct Connection {
     std::string lossReason;
     bool startIsUnserved = false;  // a start was sent and nothing answered since
     std::unique_ptr<client::ClientConnection> client;
   };
 
-  // Each returns whether the script goes on; when not, status_ and stderr say why.
+  // Each returns whether the script goes on; when not, status_ and stderr say why. All lines; one line; what it says; a
+  // line for the service. Then the two others that a line may be.
   bool playLines(int fd);
   bool playLine(std::string_view text, std::size_t line);
   bool playStep(const script::ScriptStep& step);
   bool playRequest(const script::ScriptStep& step);
   bool sleep(double seconds);
   bool disconnect(const std::string& name);
+  // At the script's end: fetches the replies that are on their way, or waits for the end of a killed service.
   bool finish();
+  // The connection of this name, made when there is none; null when it can't be made or was lost.
   Connection* connect(const std::string& name);
   // Waits until every start on connections other than `except` was served.
   bool settleStarts(const Connection* except);
+  // Has the service answer something on this connection, which serves its requests in their order.
   bool settle(const std::string& name, Connection& connection);
+  // Waits until `done`, at most for the time of an answer.
   bool waitForReply(const std::string& name, Connection& connection, const bool& done);
 
   // Waits until something happens on a connection or `inputFd` (-1: none) can be read, at most until `deadline`.
+  // Replies that came are printed within the call, by the handlers of their requests.
   bool pump(std::optional<Clock::time_point> deadline, int inputFd = -1, bool* inputIsReady = nullptr);
+  // Waits for the script, however long that takes.
   bool waitForInput(int fd);
+  // Whether none was lost, but for those that the script asked to lose.
   bool checkConnections();
   void printReply(const script::ScriptStep& step, const client::Reply& reply);
+  // Stops as unreachable, with the reason of the loss.
   bool stopForLoss(const std::string& name, const Connection& connection);
+  // Ends the script with this exit status and says why; false.
   bool stop(int status, const std::string& why);
 
   ServiceAddress address_;  // the one place alone, once the service was reached
   const std::string scriptName_;
   Output& output_;
+  // By the script's names; one that was lost stays until its line asks for it.
   std::map<std::string, Connection> connections_;
   std::size_t line_ = 0;
   bool serviceWasKilled_ = false;  // lost connections are what the script asked for

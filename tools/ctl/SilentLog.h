@@ -5,6 +5,7 @@
 
 namespace tarn::ctl {
 
+// Takes every line and keeps none.
 class SilentLog final : public platform::Log {
  public:
   void write(const platform::LogEntry& /*entry*/) noexcept override {}

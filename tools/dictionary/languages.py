@@ -9,12 +9,15 @@ NOTE = "Made by tools/dictionary/generate.py from dictionary/messages.toml: chan
 
 
 def c_header(table):
-    lines = ["/* What can be said: numbers and keys of messages. docs/messages.md tells what they mean.", " *",
-             f" * {NOTE} */", "#pragma once", "", "#include <stdint.h>", "", "/* clang-format off */"]
+    lines = ["/* What can be said: numbers and keys of messages, each after what it means, a key with its kind, unit",
+             " * and range. docs/messages.md tells who reads and writes them. Constants alone: no library is needed.",
+             " *", f" * {NOTE} */", "#pragma once", "", "#include <stdint.h>", "", "/* clang-format off */"]
 
     def numbers(title, prefix, rows, macro, show=str):
-        lines.extend(["", f"/* {title} */"])
-        lines.extend(f"#define TARN_{prefix}_{upper(row.called())} {macro}({show(row.number)})" for row in rows)
+        lines.extend(["", f"/* {title} */", ""])
+        for row in rows:
+            lines.extend([*c_comment(row.text),
+                          f"#define TARN_{prefix}_{upper(row.called())} {macro}({show(row.number)})"])
 
     numbers("Categories. A domain may be added: TARN_DOMAIN_DSP | TARN_CATEGORY_PLAYBACK.", "CATEGORY",
             table.categories, "UINT32_C")
@@ -22,9 +25,10 @@ def c_header(table):
     numbers("Types.", "TYPE", table.types, "UINT16_C")
     numbers("Service types.", "SERVICE", table.services, "UINT16_C")
     for section, keys in sections(table):
-        lines.extend(["", f"/* {section}. */"])
+        lines.extend(["", f"/* {section}. */", ""])
         for key in keys:
-            lines.append(f'#define TARN_{key_word(key)} "{key.name.rstrip("*")}" /* {key.measure()} */')
+            lines.extend([*c_comment(f"{key.text} ({key.measure()})"),
+                          f'#define TARN_{key_word(key)} "{key.name.rstrip("*")}"'])
     return "\n".join(lines) + "\n\n/* clang-format on */\n"
 
 
@@ -91,6 +95,10 @@ def sections(table):
 
 def key_word(key):
     return ("KEY_PREFIX_" if key.is_pattern() else "KEY_") + upper(key.name)
+
+
+def c_comment(text):
+    return ("/* " + "\n * ".join(textwrap.wrap(text, COLUMNS - 6, break_long_words=False)) + " */").split("\n")
 
 
 def comment(lead, text):

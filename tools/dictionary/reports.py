@@ -1,8 +1,9 @@
 """The functions by which clients in C, C++ and Python report without knowing a key."""
 
+import json
 import textwrap
 
-from languages import COLUMNS, NOTE, comment
+from languages import COLUMNS, NOTE, c_comment, comment
 
 C_KINDS = {"boolean": "TARNREPORTING_BOOLEAN", "integer": "TARNREPORTING_INTEGER", "number": "TARNREPORTING_DOUBLE",
            "text": "TARNREPORTING_TEXT_VALUE"}
@@ -37,12 +38,15 @@ extern "C" {{
 
 """
 C_HELPERS = """
+/* A text that ends at its zero, as a value; null counts as empty. Longer than a message may hold it is refused when it
+ * is posted. */
 static inline tarnreporting_value tarnreporting_report_text(const char* text) {
   const size_t length = text != NULL ? strlen(text) : 0;
   return tarnreporting_text(text, length < UINT32_MAX ? (uint32_t)length : UINT32_MAX);
 }
 
-/* Of a rate in Hz, as messages have it: 48000.0. Writes up to 12 bytes to `room`. */
+/* Of a rate in Hz, as messages have it: 48000.0. Writes up to 12 bytes to `room`, which must stay until the value is
+ * posted. Without the C library's formatting, which may lock and allocate. */
 static inline tarnreporting_value tarnreporting_report_hertz(uint32_t rate, char* room) {
   uint32_t digits = 1;
   uint32_t rest;
@@ -60,6 +64,8 @@ static inline tarnreporting_value tarnreporting_report_hertz(uint32_t rate, char
 }
 """
 C_POST = """
+/* What all reports do: posts the values in the shape of this report, with the time of the event or, for 0, of the
+ * call. For real-time threads. */
 static inline int tarnreporting_report_post(tarnreporting_writer* writer, const tarnreporting_reports* reports,
                                             int report, uint64_t stamp_ns, const tarnreporting_value* values,
                                             size_t count) {
@@ -69,7 +75,10 @@ static inline int tarnreporting_report_post(tarnreporting_writer* writer, const 
 }
 """
 C_DECLARE = """
-/* Declares all of them for the session. */
+/* Declares the shapes of all reports for the session, once, and fills in `reports`, which the caller owns. Allocates
+ * and may wait for a lock: not for real-time threads. TARNREPORTING_ARGUMENT for a null pointer, else what
+ * tarnreporting_shape_declare() answers; when it fails in between, those before are declared and `reports` is not to be
+ * used. */
 static inline int tarnreporting_reports_declare(tarnreporting_session* session, tarnreporting_reports* reports) {
   static const struct {
     uint32_t category;
@@ -117,8 +126,12 @@ CPP_TOP = f"""\
 namespace tarnreporting {{
 
 // clang-format off
+// The reports of one session. Holds pointers alone: copies report to the same session, and all threads may use one,
+// each with its own writer.
 class Reports {{
  public:
+  // Declares the shapes of all reports, each of which counts among the client's 1024. Throws Error where the library
+  // refuses one. Allocates: not for real-time threads; everything else here is for them.
   explicit Reports(const Session& session) {{
     if (const int code = tarnreporting_reports_declare(session.raw(), &reports_); code != TARNREPORTING_OK) {{
       throw Error(code);
@@ -158,7 +171,10 @@ class Reports:
 
 def c_reports(table):
     names = ["TARNREPORTING_REPORT_" + word(report).upper() for report in table.reports]
-    lines = ["enum {", *(f"  {name}," for name in names), "  TARNREPORTING_REPORT_COUNT", "};", "",
+    lines = ["/* Which report is which, by its shape in tarnreporting_reports. */",
+             "enum {", *(f"  {name}," for name in names), "  TARNREPORTING_REPORT_COUNT", "};", "",
+             *c_comment("The shapes of the reports of one session, which owns them: not to be used once the session "
+                        "ended. It never changes once it is declared, so all threads may post with it."),
              "typedef struct tarnreporting_reports tarnreporting_reports;", "struct tarnreporting_reports {",
              "  tarnreporting_shape* shapes[TARNREPORTING_REPORT_COUNT];", "};"]
     most = max((len(report.fields) for report in table.reports), default=1)
@@ -202,18 +218,25 @@ def c_function(table, report):
                  for each in report.arguments()]
     head = f"static inline int tarnreporting_report_{word(report)}"
     first = ["tarnreporting_writer* writer", "const tarnreporting_reports* reports"]
-    lines = ["", *listed(f"{head}_at(", [*first, "uint64_t stamp_ns", *arguments], ") {")]
+    lines = ["", *c_comment(f"{posted(report)} The event was at `stamp_ns`."),
+             *listed(f"{head}_at(", [*first, "uint64_t stamp_ns", *arguments], ") {")]
     if any(each.hertz for each in report.fields):
         lines.append("  char room[12];")
     lines.append(f"  tarnreporting_value values[{len(report.fields)}];")
     lines += [f"  values[{at}] = {c_value(table, each)};" for at, each in enumerate(report.fields)]
     index = f"TARNREPORTING_REPORT_{word(report).upper()}"
     lines += [f"  return tarnreporting_report_post(writer, reports, {index}, stamp_ns, values, {len(report.fields)});",
-              "}", "/* " + "\n * ".join(textwrap.wrap(report.text, COLUMNS - 6)) + " */",
-              *listed(f"{head}(", [*first, *arguments], ") {")]
+              "}", *c_comment(report.text), *listed(f"{head}(", [*first, *arguments], ") {")]
     given = ["writer", "reports", "0", *(each.argument for each in report.arguments())]
     lines += [f"  return tarnreporting_report_{word(report)}_at({', '.join(given)});", "}"]
     return "\n".join(lines) + "\n"
+
+
+def posted(report):
+    """What a report says, by its keys."""
+    keys = [f"{each.key} = {f'`{each.argument}`' if each.argument else json.dumps(each.constant)}"
+            for each in report.fields]
+    return f"Posts {report.category} {report.type}: {', '.join(keys)}."
 
 
 def c_value(table, each):
@@ -237,7 +260,7 @@ def cpp_operation(table, report):
     arguments = [("std::uint32_t " if each.hertz else CPP_TYPES[table.kind_of(each.key)]) + each.argument
                  for each in report.arguments()]
     given = ["writer.raw()", "&reports_", "stamp", *(each.argument for each in report.arguments())]
-    return "\n".join(["", *comment("  // ", report.text),
+    return "\n".join(["", *comment("  // ", f"{report.text} {posted(report)}"),
                       *listed(f"  Result {name}(", ["Writer& writer", *arguments, "std::uint64_t stamp = 0"],
                               ") const noexcept {"),
                       f"    return Result(tarnreporting_report_{word(report)}_at({', '.join(given)}));", "  }", ""])

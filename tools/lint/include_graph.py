@@ -18,7 +18,9 @@ WORKERS = ("derived",) + DIAGNOSTICS + TELEMETRY
 GROUND = BASE + ("host/system", "host/log")
 HOST = ("host/system", "host/log", "host/loop", "host/socket", "host/settings", "host/machine", "host/drivers",
         "host/ring", "host/traces", "host/traces/analysis")
-PROGRAM = SESSION + WORKERS + ("service", "wire", "recorder", "recorder/store") + HOST + ("host",)
+# The recorder's database, and what lies beside it.
+STORE = ("recorder/store", "recorder/store/files")
+PROGRAM = SESSION + WORKERS + ("service", "wire", "recorder") + STORE + HOST + ("host",)
 
 # Each folder, from the ground up, and what its files may include beside files of its own. The worker families don't
 # know each other: they meet through the session.
@@ -41,8 +43,9 @@ ROOMS = {
     "session": BASE + ("service/vocabulary",),
     **{folder: SESSION for folder in WORKERS},
     "service": SESSION + WORKERS,
-    "recorder/store": BASE,
-    "recorder": BASE + ("service/vocabulary", "recorder/store"),
+    "recorder/store/files": BASE,
+    "recorder/store": BASE + ("recorder/store/files",),
+    "recorder": BASE + ("service/vocabulary",) + STORE,
     "host/system": BASE,
     "host/log": BASE + ("host/system",),
     "host/loop": GROUND,

@@ -1,14 +1,22 @@
-"""How long a file may be: a longer one is two jobs. clang-tidy watches the length of functions."""
+"""How long a file may be, and how much a folder holds: what is beyond is two jobs. clang-tidy watches the length of
+functions.
+"""
+
+import os
 
 from tree import CXX, SCRIPTS, Finding
 
 HEADER_LINES = 250
-SOURCE_LINES = 600
-SOURCE_LINES_USUALLY = 400
-SHARE_OF_LONGER_SOURCES = 0.05
+# Of those whose comments are the manual: they are installed, and their readers have nothing else.
+INSTALLED_HEADER_LINES = 400
+SOURCE_LINES = 400
 TEST_LINES = 800
 SCRIPT_LINES = 400
 COLUMNS = 120
+# A unit is a source with its header, or either alone.
+FOLDER_UNITS = 20
+# One header a facility.
+FOLDERS_OF_ANY_SIZE = ("platform",)
 NARROW = SCRIPTS + (".md", ".cmake", ".txt")
 
 
@@ -16,7 +24,7 @@ def limit_of(path):
     if path.startswith(("tests/", "testing/", "fuzz/", "bench/")) and path.endswith(CXX):
         return TEST_LINES
     if path.endswith(".h"):
-        return HEADER_LINES
+        return INSTALLED_HEADER_LINES if "/include/" in path else HEADER_LINES
     if path.endswith(".cpp"):
         return SOURCE_LINES
     if path.endswith(SCRIPTS) or path in ("dev", ".ci/run"):
@@ -34,7 +42,7 @@ def check(tree):
         if path.endswith(NARROW) or path in ("dev", ".ci/run"):
             findings += [Finding(path, number, f"{len(line)} columns, where {COLUMNS} are the most")
                          for number, line in enumerate(text.split("\n"), 1) if too_wide(line)]
-    return sorted(findings + longer_than_usual(tree))
+    return sorted(findings + crowded_folders(tree))
 
 
 def too_wide(line):
@@ -42,10 +50,11 @@ def too_wide(line):
     return len(line) > COLUMNS and not line.lstrip().startswith("|") and "://" not in line
 
 
-def longer_than_usual(tree):
-    sources = {path: text.count("\n") for path, text in tree.files.items() if limit_of(path) == SOURCE_LINES}
-    longer = sorted(path for path, lines in sources.items() if lines > SOURCE_LINES_USUALLY)
-    if len(longer) <= max(1, SHARE_OF_LONGER_SOURCES * len(sources)):
-        return []
-    return [Finding(path, sources[path], f"one of {len(longer)} sources of more than {SOURCE_LINES_USUALLY} lines: "
-                    "more than one in twenty") for path in longer]
+def crowded_folders(tree):
+    units = {}
+    for path in tree.cxx():
+        folder, name = os.path.split(path)
+        units.setdefault(folder, set()).add(os.path.splitext(name)[0])
+    return [Finding(folder, len(names), f"{len(names)} units, where {FOLDER_UNITS} are the most: two rooms in one")
+            for folder, names in sorted(units.items())
+            if len(names) > FOLDER_UNITS and folder not in FOLDERS_OF_ANY_SIZE]

@@ -17,14 +17,14 @@ EXCEPTIONS = {
     ("plist/Key.cpp", "instance"): "one copy of each text that never changes; keys are made before main",
     ("plist/KeyList.cpp", "instance"): "one copy of each key list that never changes, likewise",
     ("tools/ctl/EventsCommand.cpp", "stopRequested"): "a signal handler reaches nothing else",
-    ("recorder/store/MappedGuard.cpp", "guarded"): "a signal handler reaches nothing else",
-    ("recorder/store/MappedGuard.cpp", "once"): "the handler is installed once a process",
+    ("recorder/store/files/MappedGuard.cpp", "guarded"): "a signal handler reaches nothing else",
+    ("recorder/store/files/MappedGuard.cpp", "once"): "the handler is installed once a process",
     **{("clients/c/src/Forks.cpp", name): "fork() happens to the whole process that loaded the library"
        for name in ("mutex", "once", "first")},
     ("host/loop/CurrentQueue.h", "current_"): "which queue a thread serves belongs to the thread",
     ("host/log/LogClient.h", "current_"): "for whom a thread works belongs to the thread",
     ("host/loop/WorkLane.h", "current_"): "and so does whose work of it that is",
-    ("testing/OwnMemory.h", "depth_"): "what a fake does on a thread belongs to the thread",
+    ("testing/backends/OwnMemory.h", "depth_"): "what a fake does on a thread belongs to the thread",
     ("host/system/MemoryReserve.h", "refusable_"): "whether a thread's work may be refused belongs to the thread",
     ("host/system/MemoryReserve.cpp", "reserve"): "operator new and its handler are the process's",
 }

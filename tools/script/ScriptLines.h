@@ -12,9 +12,11 @@
 
 namespace tarn::script {
 
+// next() until it is Incomplete, then fill(), and again; an end of the file without a line end closes the last line.
 class ScriptLines {
  public:
-  // A longer line is refused: no request may be as long.
+  // A longer line is refused: no request may be as long. The service bounds frames by itself, at 1 MiB unless its
+  // configuration says otherwise.
   static constexpr std::size_t kMaxLineBytes = std::size_t{16} << 20U;
 
   enum class Next {
@@ -29,9 +31,11 @@ class ScriptLines {
   ScriptLines(const ScriptLines&) = delete;
   ScriptLines& operator=(const ScriptLines&) = delete;
 
-  // The next line without its line end; valid until the next call of either. The last line needs no line end.
+  // The next line without its line end; valid until the next call of either. The last line needs no line end. Never
+  // reads. After TooLong there is no way on.
   Next next(std::string_view& line);
-  // Reads once, waiting when there is nothing yet.
+  // Reads once, waiting when there is nothing yet. 64 KiB at the most; an interrupted read is begun again. The error is
+  // the system's.
   [[nodiscard]] Status fill();
 
   // Number of the line that next() gave last, or found too long; the first is 1.
@@ -40,6 +44,7 @@ class ScriptLines {
 
  private:
   int fd_;
+  // What was read and not given yet; lines that were given go at the next fill().
   std::string buffer_;
   std::size_t begin_ = 0;    // of the next line
   std::size_t scanned_ = 0;  // no line end lies before it

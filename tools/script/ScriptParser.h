@@ -16,7 +16,9 @@
 
 namespace tarn::script {
 
-// The step that `text`, line number `line` of its script, stands for, or what is wrong with it.
+// The step that `text`, line number `line` of its script, stands for, or what is wrong with it. The text of a fault has
+// what is wrong and what was expected, without the line's number; the first thing that is wrong counts. Numbers keep
+// their kind: an integer isn't a double.
 Result<ScriptStep> parseLine(std::string_view text, std::size_t line);
 
 // Whether the line holds nothing but white space; such lines are passed over.

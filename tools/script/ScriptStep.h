@@ -8,6 +8,7 @@
 
 namespace tarn::script {
 
+// Plain data. What doesn't belong to the kind is as it was made.
 struct ScriptStep {
   enum class Kind {
     Request,     // a remote operation
@@ -15,11 +16,15 @@ struct ScriptStep {
     Disconnect,  // close the client's connection
   };
 
+  // The line's number, from 1, for replies and complaints.
   std::size_t line = 0;
   Kind kind = Kind::Request;
+  // The two texts come back in the line that a reply is printed as.
   std::string op;      // the operation as the script names it
   std::string client;  // names the connection
+  // With the arguments that the operation has, within their ranges.
   wire::Request request;
+  // From 0 to a year, of a sleep.
   double seconds = 0;
 };
 

@@ -15,8 +15,10 @@
 
 namespace tarn::script {
 
+// A constant; it asks the vocabulary each time.
 class NameTable {
  public:
+  // The vocabulary's two directions, with its enumeration as a bare number.
   using Parser = std::uint64_t (*)(std::string_view name);
   using Printer = std::string (*)(std::uint64_t number);
 
@@ -24,8 +26,10 @@ class NameTable {
   constexpr NameTable(Parser parser, Printer printer, std::string_view fallbackName)
       : parser_(parser), printer_(printer), fallbackName_(fallbackName) {}
 
+  // Nothing for a name that the parser doesn't hold.
   std::optional<std::uint64_t> numberOf(std::string_view name) const;
-  // All names, for a complaint: "Generic, Record, ...".
+  // All names, for a complaint: "Generic, Record, ...". In the order of their numbers, the one that unknown texts parse
+  // to included.
   std::string listed() const;
 
  private:
@@ -34,6 +38,7 @@ class NameTable {
   std::string_view fallbackName_;
 };
 
+// For the members "category", "type" and "serviceType" of a line.
 const NameTable& categoryNames();
 const NameTable& typeNames();
 const NameTable& serviceTypeNames();

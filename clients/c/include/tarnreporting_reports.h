@@ -20,6 +20,7 @@ extern "C" {
 
 /* clang-format off */
 
+/* Which report is which, by its shape in tarnreporting_reports. */
 enum {
   TARNREPORTING_REPORT_OUTPUT_RUNNING,
   TARNREPORTING_REPORT_OUTPUT_STOPPED,
@@ -34,17 +35,22 @@ enum {
   TARNREPORTING_REPORT_COUNT
 };
 
+/* The shapes of the reports of one session, which owns them: not to be used once the session ended. It never changes
+ * once it is declared, so all threads may post with it. */
 typedef struct tarnreporting_reports tarnreporting_reports;
 struct tarnreporting_reports {
   tarnreporting_shape* shapes[TARNREPORTING_REPORT_COUNT];
 };
 
+/* A text that ends at its zero, as a value; null counts as empty. Longer than a message may hold it is refused when it
+ * is posted. */
 static inline tarnreporting_value tarnreporting_report_text(const char* text) {
   const size_t length = text != NULL ? strlen(text) : 0;
   return tarnreporting_text(text, length < UINT32_MAX ? (uint32_t)length : UINT32_MAX);
 }
 
-/* Of a rate in Hz, as messages have it: 48000.0. Writes up to 12 bytes to `room`. */
+/* Of a rate in Hz, as messages have it: 48000.0. Writes up to 12 bytes to `room`, which must stay until the value is
+ * posted. Without the C library's formatting, which may lock and allocate. */
 static inline tarnreporting_value tarnreporting_report_hertz(uint32_t rate, char* room) {
   uint32_t digits = 1;
   uint32_t rest;
@@ -61,7 +67,10 @@ static inline tarnreporting_value tarnreporting_report_hertz(uint32_t rate, char
   return tarnreporting_text(room, digits + 2);
 }
 
-/* Declares all of them for the session. */
+/* Declares the shapes of all reports for the session, once, and fills in `reports`, which the caller owns. Allocates
+ * and may wait for a lock: not for real-time threads. TARNREPORTING_ARGUMENT for a null pointer, else what
+ * tarnreporting_shape_declare() answers; when it fails in between, those before are declared and `reports` is not to be
+ * used. */
 static inline int tarnreporting_reports_declare(tarnreporting_session* session, tarnreporting_reports* reports) {
   static const struct {
     uint32_t category;
@@ -96,6 +105,8 @@ static inline int tarnreporting_reports_declare(tarnreporting_session* session, 
   return TARNREPORTING_OK;
 }
 
+/* What all reports do: posts the values in the shape of this report, with the time of the event or, for 0, of the
+ * call. For real-time threads. */
 static inline int tarnreporting_report_post(tarnreporting_writer* writer, const tarnreporting_reports* reports,
                                             int report, uint64_t stamp_ns, const tarnreporting_value* values,
                                             size_t count) {
@@ -104,6 +115,8 @@ static inline int tarnreporting_report_post(tarnreporting_writer* writer, const 
   return tarnreporting_post_at(writer, reports->shapes[report], stamp_ns, values, count);
 }
 
+/* Posts Playback Start: session_output_running = true, KvSessionVolume = `volume`, active_devices = `route`. The
+ * event was at `stamp_ns`. */
 static inline int tarnreporting_report_output_running_at(tarnreporting_writer* writer,
                                                          const tarnreporting_reports* reports, uint64_t stamp_ns,
                                                          double volume, const char* route) {
@@ -120,6 +133,7 @@ static inline int tarnreporting_report_output_running(tarnreporting_writer* writ
   return tarnreporting_report_output_running_at(writer, reports, 0, volume, route);
 }
 
+/* Posts Playback Stop: session_output_running = false. The event was at `stamp_ns`. */
 static inline int tarnreporting_report_output_stopped_at(tarnreporting_writer* writer,
                                                          const tarnreporting_reports* reports, uint64_t stamp_ns) {
   tarnreporting_value values[1];
@@ -132,6 +146,7 @@ static inline int tarnreporting_report_output_stopped(tarnreporting_writer* writ
   return tarnreporting_report_output_stopped_at(writer, reports, 0);
 }
 
+/* Posts Volume Generic: KvSessionVolume = `volume`. The event was at `stamp_ns`. */
 static inline int tarnreporting_report_volume_changed_at(tarnreporting_writer* writer,
                                                          const tarnreporting_reports* reports, uint64_t stamp_ns,
                                                          double volume) {
@@ -145,6 +160,7 @@ static inline int tarnreporting_report_volume_changed(tarnreporting_writer* writ
   return tarnreporting_report_volume_changed_at(writer, reports, 0, volume);
 }
 
+/* Posts RouteChange Generic: active_devices = `route`. The event was at `stamp_ns`. */
 static inline int tarnreporting_report_route_changed_at(tarnreporting_writer* writer,
                                                         const tarnreporting_reports* reports, uint64_t stamp_ns,
                                                         const char* route) {
@@ -158,6 +174,8 @@ static inline int tarnreporting_report_route_changed(tarnreporting_writer* write
   return tarnreporting_report_route_changed_at(writer, reports, 0, route);
 }
 
+/* Posts Input Start: session_input_running = true, active_devices = `route`, vp_config_primary_vocoder = `codec`,
+ * vp_config_primary_vocoderFs = `rate`. The event was at `stamp_ns`. */
 static inline int tarnreporting_report_input_running_at(tarnreporting_writer* writer,
                                                         const tarnreporting_reports* reports, uint64_t stamp_ns,
                                                         const char* route, const char* codec, uint32_t rate) {
@@ -175,6 +193,8 @@ static inline int tarnreporting_report_input_running(tarnreporting_writer* write
   return tarnreporting_report_input_running_at(writer, reports, 0, route, codec, rate);
 }
 
+/* Posts Input Setup: vp_config_primary_vocoder = `codec`, vp_config_primary_vocoderFs = `rate`. The event was at
+ * `stamp_ns`. */
 static inline int tarnreporting_report_codec_changed_at(tarnreporting_writer* writer,
                                                         const tarnreporting_reports* reports, uint64_t stamp_ns,
                                                         const char* codec, uint32_t rate) {
@@ -190,6 +210,7 @@ static inline int tarnreporting_report_codec_changed(tarnreporting_writer* write
   return tarnreporting_report_codec_changed_at(writer, reports, 0, codec, rate);
 }
 
+/* Posts Input Stop: session_input_running = false. The event was at `stamp_ns`. */
 static inline int tarnreporting_report_input_stopped_at(tarnreporting_writer* writer,
                                                         const tarnreporting_reports* reports, uint64_t stamp_ns) {
   tarnreporting_value values[1];
@@ -202,6 +223,8 @@ static inline int tarnreporting_report_input_stopped(tarnreporting_writer* write
   return tarnreporting_report_input_stopped_at(writer, reports, 0);
 }
 
+/* Posts IO Error: issue_type = "overload", smallest_buffer_frame_size = `frames`, io_cycle = `cycle`. The event was
+ * at `stamp_ns`. */
 static inline int tarnreporting_report_overload_at(tarnreporting_writer* writer, const tarnreporting_reports* reports,
                                                    uint64_t stamp_ns, int64_t frames, int64_t cycle) {
   tarnreporting_value values[3];
@@ -216,6 +239,7 @@ static inline int tarnreporting_report_overload(tarnreporting_writer* writer, co
   return tarnreporting_report_overload_at(writer, reports, 0, frames, cycle);
 }
 
+/* Posts Error Error: issue_type = `what`. The event was at `stamp_ns`. */
 static inline int tarnreporting_report_error_at(tarnreporting_writer* writer, const tarnreporting_reports* reports,
                                                 uint64_t stamp_ns, const char* what) {
   tarnreporting_value values[1];
@@ -228,6 +252,7 @@ static inline int tarnreporting_report_error(tarnreporting_writer* writer, const
   return tarnreporting_report_error_at(writer, reports, 0, what);
 }
 
+/* Posts Generic Stop: session_duration = `seconds`. The event was at `stamp_ns`. */
 static inline int tarnreporting_report_session_duration_at(tarnreporting_writer* writer,
                                                            const tarnreporting_reports* reports, uint64_t stamp_ns,
                                                            double seconds) {

@@ -1,13 +1,13 @@
 #include "clients/c/src/Client.h"
 
-#include <signal.h>
 #include <sys/eventfd.h>
 #include <sys/mman.h>
 #include <sys/random.h>
-#include <time.h>
 #include <unistd.h>
 
+#include <csignal>
 #include <cstring>
+#include <ctime>
 #include <new>
 
 namespace tarn::reporting {

@@ -85,8 +85,8 @@ bool tarnreporting_client::makeRoomForFieldShape(Session& session) noexcept {
       oldest = place;
     }
   }
+  if (oldest == nullptr || !isDrained(*(*oldest)->lastUse)) return false;
   Shape& shape = **oldest;
-  if (!isDrained(*shape.lastUse)) return false;
   *oldest = shape.next;
   removeShape(shape);
   --session.fieldShapes;

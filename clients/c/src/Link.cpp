@@ -104,7 +104,7 @@ long Link::sendPart() noexcept {
   const bool withDescriptors = attachmentCount_ != 0 && attachments_[0].offset == sent_;
   const std::size_t next = withDescriptors ? 1 : 0;
   const std::size_t end = next < attachmentCount_ ? attachments_[next].offset : out_.size();
-  iovec part{const_cast<std::uint8_t*>(out_.data()) + sent_, end - sent_};
+  iovec part{out_.data() + sent_, end - sent_};
   alignas(cmsghdr) char control[CMSG_SPACE(sizeof attachments_[0].descriptors)] = {};
   msghdr message{};
   message.msg_iov = &part;

@@ -1,5 +1,10 @@
 // Whether a text is UTF-8: no stray byte, no overlong form, no surrogate, nothing over U+10FFFF. Bounded by the text's
 // length, and eight bytes at a time where they are ASCII. Stateless. Threads: any.
+//
+//   00-7F                      one byte
+//   C2-DF 80-BF                two
+//   E0-EF 80-BF 80-BF          three; after E0 from A0 on, after ED up to 9F
+//   F0-F4 80-BF 80-BF 80-BF    four; after F0 from 90 on, after F4 up to 8F
 #pragma once
 
 #include <cstddef>
@@ -8,7 +13,7 @@
 
 namespace tarn::reporting {
 
-// Bytes of the well-formed character at the front; 0 when there is none.
+// Bytes of the well-formed character at the front, 1 to 4; 0 when there is none. At least one byte must be left.
 inline std::size_t characterLength(const unsigned char* at, std::size_t left) noexcept {
   const unsigned first = at[0];
   if (first < 0x80) return 1;
@@ -24,6 +29,7 @@ inline std::size_t characterLength(const unsigned char* at, std::size_t left) no
   return length;
 }
 
+// Whether all of it is well-formed; of an empty text it is. Used in post(), so it neither allocates nor calls anything.
 inline bool isUtf8(const char* text, std::size_t length) noexcept {
   const auto* at = reinterpret_cast<const unsigned char*>(text);
   std::size_t left = length;

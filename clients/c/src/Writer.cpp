@@ -3,10 +3,10 @@
 #include <fcntl.h>
 #include <sys/eventfd.h>
 #include <sys/mman.h>
-#include <time.h>
 #include <unistd.h>
 
 #include <cerrno>
+#include <ctime>
 #include <new>
 
 #include "clients/c/src/Utf8.h"

@@ -19,12 +19,15 @@
 
 namespace tarn::trace_analysis {
 
+// Beyond any of these the whole file is refused: half a trace would give wrong intervals. Files of our own are at most
+// 64 MiB, by their default; other programs write larger ones.
 struct TraceLimits {
   std::uint64_t mostBytes = std::uint64_t{256} << 20U;
   std::size_t mostEvents = 2'000'000;
   std::size_t mostDepth = 64;
 };
 
+// 24 bytes each: a trace may hold a million.
 struct Interval {
   std::int64_t begin = 0;       // nanoseconds
   std::int64_t duration = 0;    // nanoseconds
@@ -32,11 +35,15 @@ struct Interval {
   std::uint32_t subsystem = 0;  // likewise
 };
 
+// Each text once, however many intervals bear it.
 struct ChromeTrace {
   std::vector<std::string> texts;
   std::vector<Interval> intervals;  // in the order of their begins, an outer one before those inside it
 };
 
+// Reads a regular file, blocking. An errno value for what the system refuses (ENODEV for what is no plain file, EFBIG
+// beyond the limit), else the code is 0 and the text says what is wrong with the content. A file that is cut while it
+// is read is no whole text.
 Result<ChromeTrace> readTrace(const std::string& path, const TraceLimits& limits = {});
 // The same of bytes in memory.
 Result<ChromeTrace> parseTrace(std::string_view bytes, const TraceLimits& limits = {});

@@ -5,6 +5,9 @@
 //
 // The text must be whole, strict JSON in UTF-8, its numbers within a double's range; a byte order mark before it is
 // looked past. Threads: one at a time.
+//
+// It never recurses: how deep the text may nest is the listener's to bound, as it is told of each level. Nothing is
+// thrown but by the listener and for want of memory.
 #pragma once
 
 #include <cstddef>
@@ -14,7 +17,8 @@
 
 namespace tarn::trace_analysis {
 
-// Each operation returns whether to go on. Texts live as long as the call.
+// Each operation returns whether to go on. Texts live as long as the call. A boolean and a null are looked past:
+// nothing that is wanted is one.
 class JsonListener {
  public:
   struct Number {
@@ -29,11 +33,14 @@ class JsonListener {
   virtual bool endObject() = 0;
   virtual bool beginArray() = 0;
   virtual bool endArray() = 0;
+  // With its escapes resolved; a view of the text where it has none.
   virtual bool text(std::string_view text) = 0;
   virtual bool number(const Number& number) = 0;
 };
 
-// Nothing when it was read to its end; else the byte, counted from 1, at which it isn't JSON or the listener ended it.
+// Tells the listener everything up to the end or the first fault, in the text's order. Nothing when it was read to its
+// end; else the byte, counted from 1, at which it isn't JSON or the listener ended it. What the listener was told
+// before a fault was right as far as it went.
 std::optional<std::size_t> scanJson(std::string_view text, JsonListener& listener);
 
 }  // namespace tarn::trace_analysis

@@ -26,6 +26,7 @@
 
 namespace tarn::trace_analysis {
 
+// Beyond any of these there are no probes at all, and the failure says which.
 struct ProbeLimits {
   std::size_t mostProbes = 256;
   std::size_t mostDepth = 16;

@@ -12,7 +12,8 @@
 
 namespace tarn::trace_analysis {
 
-// What the library asks of the program that loads it.
+// What the library asks of the program that loads it. Both outlive everything that the library makes; called on the
+// server queue.
 struct Host {
   // The descriptions as a JSON array, without those that JSON can't hold.
   std::function<std::string(const std::vector<plist::Dictionary>&)> jsonOf;

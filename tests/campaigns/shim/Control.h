@@ -27,7 +27,9 @@ enum class Word : std::size_t {
   Sequence = 9,           // entries of the journal of writes
   SyncDelay = 10,         // milliseconds that the next synchronisation takes longer; taken back by it
   Delays = 11,            // synchronisations that were delayed
-  FailuresInARow = 12,    // allocations that fail from that one on; 0: that one alone
+  FaultSite = 12,         // the call that fails is counted among those from this site alone; 0: among all of its kind
+  SiteCalls = 13,         // calls from that site
+  FailuresInARow = 14,    // allocations that fail from that one on; 0: that one alone
   FirstCounter = 16,      // calls of each kind
 };
 

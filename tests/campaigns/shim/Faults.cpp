@@ -1,15 +1,23 @@
 // Faults: counts the system calls of a program by kind, and lets one of them fail or do half of what it should, or all
 // of some kinds fail for a while. What to do stands in the control page.
+//
+// A site is where in the program a call comes from: its callers up to some depth. Where TARN_SHIM_SITES names a file,
+// kind and site of each call are appended to it.
+#include <execinfo.h>
 #include <fcntl.h>
 #include <poll.h>
 #include <sys/epoll.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
+#include <sys/syscall.h>
+#include <unistd.h>
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
 #include <cstdarg>
 #include <cstdio>
+#include <cstdlib>
 
 #include "tests/campaigns/shim/Control.h"
 
@@ -40,6 +48,54 @@ enum class Kind : std::size_t {
   Socket,
 };
 
+// So deep, the store's calls are told apart by what they are made for; deeper, by what else was going on.
+constexpr int kSiteDepth = 8;
+
+void* baseOf(void* address) noexcept {
+  Dl_info info{};
+  return ::dladdr(address, &info) != 0 ? info.dli_fbase : nullptr;
+}
+
+// The same in each run, wherever the parts of the program are loaded. Never 0.
+std::uint64_t siteOfCall() noexcept {
+  constexpr std::uint64_t kPrime = 1099511628211U;
+  std::array<void*, kSiteDepth + 6> frames{};
+  const int count = ::backtrace(frames.data(), static_cast<int>(frames.size()));
+  void* const own = baseOf(reinterpret_cast<void*>(&siteOfCall));
+  std::uint64_t site = 14695981039346656037U;
+  int depth = 0;
+  for (int i = 0; i < count && depth < kSiteDepth; ++i) {
+    void* const frame = frames[static_cast<std::size_t>(i)];
+    void* const base = baseOf(frame);
+    if (base == own) continue;
+    const auto place = static_cast<std::uint64_t>(static_cast<char*>(frame) - static_cast<char*>(base));
+    site = (site ^ place) * kPrime;
+    ++depth;
+  }
+  return site | 1U;
+}
+
+int openSites() noexcept {
+  const char* const path = std::getenv("TARN_SHIM_SITES");
+  if (path == nullptr) return -1;
+  return static_cast<int>(::syscall(SYS_openat, AT_FDCWD, path, O_WRONLY | O_CREAT | O_APPEND | O_CLOEXEC, 0600));
+}
+
+void noteSite(Kind kind) noexcept {
+  static const int file = openSites();
+  if (file < 0) return;
+  const std::array<std::uint64_t, 2> entry{static_cast<std::uint64_t>(kind), siteOfCall()};
+  ::syscall(SYS_write, file, entry.data(), sizeof entry);
+}
+
+// Whether this call, one of the kind that is to fail, is the one.
+bool isMeant(Words* words, std::uint64_t ordinal) noexcept {
+  const std::uint64_t wanted = word(words, Word::FaultOrdinal).load();
+  const std::uint64_t site = word(words, Word::FaultSite).load();
+  if (site == 0) return ordinal == wanted;
+  return siteOfCall() == site && word(words, Word::SiteCalls).fetch_add(1) + 1 == wanted;
+}
+
 // What this call is to do: 0 its work, kShort half of it, anything else an errno value to fail with.
 std::uint64_t actionFor(Kind kind) noexcept {
   Words* const words = controlWords();
@@ -50,7 +106,8 @@ std::uint64_t actionFor(Kind kind) noexcept {
     word(words, Word::Fired).fetch_add(1);
     return word(words, Word::StickyError).load();
   }
-  if (word(words, Word::FaultKind).load() != place + 1 || word(words, Word::FaultOrdinal).load() != ordinal) return 0;
+  noteSite(kind);
+  if (word(words, Word::FaultKind).load() != place + 1 || !isMeant(words, ordinal)) return 0;
   word(words, Word::Fired).fetch_add(1);
   return word(words, Word::FaultAction).load();
 }

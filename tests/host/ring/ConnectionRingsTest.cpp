@@ -40,6 +40,18 @@ TEST_F(ConnectionRingsTest, MessagesAreServedInTheirOrder) {
   EXPECT_EQ(counts().messages, 500U);
 }
 
+TEST_F(ConnectionRingsTest, WhatARecordAskedForMayBeDoneBeforeTheNextIsRead) {
+  start();
+  ClientRing ring;
+  ASSERT_EQ(declare(5), "");
+  for (std::uint64_t number = 0; number < 3; ++number) {
+    ASSERT_TRUE(ring.message(5, {number}));
+  }
+  ASSERT_EQ(open(ring).error.text(), "");
+  ASSERT_TRUE(eventuallyServed(3));
+  running_.onQueue([&] { EXPECT_EQ(owner_->workedOff, (std::vector<std::size_t>{1, 2, 3})); });
+}
+
 TEST_F(ConnectionRingsTest, FramesOfTheWireAreServedToo) {
   start();
   ClientRing ring;

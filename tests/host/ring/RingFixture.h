@@ -27,6 +27,7 @@ class NotingOwner : public linux_host::RingOwner {
     requests.push_back(request);
     ++count;
   }
+  void workOffRingRequest() override { workedOff.push_back(requests.size()); }
   void afterRingRequests(platform::Work work) override { loop_.queue()->async(std::move(work)); }
   std::string description() const override { return "connection 1 of process 2"; }
 
@@ -34,6 +35,7 @@ class NotingOwner : public linux_host::RingOwner {
   std::atomic<bool> hasNoMemory{false};
   std::atomic<std::size_t> count{0};
   std::vector<wire::DecodedRequest> requests;
+  std::vector<std::size_t> workedOff;  // so many requests had come each time
 
  private:
   linux_host::MainLoop& loop_;

@@ -70,6 +70,17 @@ TEST(Ledger, EachMessageIsInOneMember) {
   EXPECT_EQ(status.get("messages_waiting").asInt64(), 10);
 }
 
+TEST(Ledger, TellsWhatTheLogsOfSessionsTake) {
+  ServiceCounts service;
+  service.logs = {1000, 2000, 3, 4, 5};
+  const auto status = Ledger().status(service, 0, {});
+  EXPECT_EQ(status.get("log_bytes").asInt64(), 1000);
+  EXPECT_EQ(status.get("log_overflow_bytes").asInt64(), 2000);
+  EXPECT_EQ(status.get("log_overflow_sessions").asInt64(), 3);
+  EXPECT_EQ(status.get("log_overflow_failures").asInt64(), 4);
+  EXPECT_EQ(status.get("log_messages_lost").asInt64(), 5);
+}
+
 TEST(DescriptorLimit, LeavesRoomForTheRestOfTheProcess) {
   EXPECT_EQ(connectionsWithin(1024), 960u);
   EXPECT_EQ(connectionsWithin(129), 65u);

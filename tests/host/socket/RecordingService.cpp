@@ -10,7 +10,8 @@ namespace tarn::testing {
 // What is exported to one client.
 class RecordingService::Client final : public platform::TarnReportingServiceProtocol {
  public:
-  Client(RecordingService& service, int number) : service_(service), prefix_(std::to_string(number) + " ") {}
+  Client(RecordingService& service, int number)
+      : service_(service), number_(number), prefix_(std::to_string(number) + " ") {}
 
   void createReportingSession(std::int64_t reporterID, platform::Acknowledge reply) override {
     work("createReportingSession " + std::to_string(reporterID),
@@ -80,6 +81,10 @@ class RecordingService::Client final : public platform::TarnReportingServiceProt
     work("killService", [] {});
   }
   std::size_t sessionCount() const override { return sessions_.size(); }
+  std::size_t logBytes() const override {
+    const auto found = service_.logBytes.find(number_);
+    return found == service_.logBytes.end() ? 0 : found->second;
+  }
   bool hasSession(std::int64_t reporterID) const override { return sessions_.contains(reporterID); }
 
  private:
@@ -115,6 +120,7 @@ class RecordingService::Client final : public platform::TarnReportingServiceProt
   }
 
   RecordingService& service_;
+  const int number_;
   std::string prefix_;
   std::set<std::int64_t> sessions_;  // those that were made
 };

@@ -4,6 +4,7 @@
 #pragma once
 
 #include <functional>
+#include <map>
 #include <memory>
 #include <new>
 #include <string>
@@ -29,8 +30,9 @@ class RecordingService final : public platform::ListenerDelegate,
   bool replyTwice = false;                        // every message is answered twice
   std::size_t replyPadding = 0;                   // bytes of the dictionary that reporterID answers
   std::vector<std::int64_t> reporters{1, -2, 3};  // that getAllReporters answers
-  int slices = 0;                    // a stop is so many events "1 slice" first, each of which may give way
-  std::function<void(int)> onSlice;  // called with how many are left
+  int slices = 0;                       // a stop is so many events "1 slice" first, each of which may give way
+  std::function<void(int)> onSlice;     // called with how many are left
+  std::map<int, std::size_t> logBytes;  // that the sessions of a client take, by its number
   // Where memory is missing from now on.
   enum class Short { Nowhere, Accepting, HandingOver, Working, AfterTheReply, Ending };
   Short shortOfMemory = Short::Nowhere;

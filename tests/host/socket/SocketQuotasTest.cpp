@@ -56,6 +56,43 @@ TEST_F(SocketQuotasTest, SessionsOfAUserAreBoundedAndGivenBackWithTheirConnectio
   EXPECT_EQ(refusalOf(client, requestOf(Operation::CreateReportingSession, 3)), "served");
 }
 
+TEST_F(SocketQuotasTest, MessagesAreRefusedWhileTheLogsOfAConnectionTakeTooMuch) {
+  limits.quotas.logBytesPerConnection = 1000;
+  serve();
+  TestClient client(path_);
+  TestClient other(path_);
+  EXPECT_EQ(refusalOf(client, messageRequest({{"a", 1}})), "served");
+  EXPECT_EQ(refusalOf(other, messageRequest({{"a", 1}})), "served");
+  running_.onQueue([this] { return service_->logBytes[1] = 999; });
+  EXPECT_EQ(refusalOf(client, messageRequest({{"a", 1}})), "served");
+  running_.onQueue([this] { return service_->logBytes[1] = 1000; });
+  EXPECT_EQ(refusalOf(client, messageRequest({{"a", 1}})), "over quota: log_bytes 1000 of 1000");
+  EXPECT_EQ(refusalOf(client, requestOf(Operation::StopReportingSessionForID, 1)), "served");
+  EXPECT_EQ(refusalOf(other, messageRequest({{"a", 1}})), "served");
+  EXPECT_EQ(ledger().messagesOverQuota, 1U);
+  running_.onQueue([this] { return service_->logBytes[1] = 0; });
+  EXPECT_EQ(refusalOf(client, messageRequest({{"a", 1}})), "served");
+}
+
+TEST_F(SocketQuotasTest, LogsOfAUserAreBoundedAndToldAsTheyAreNow) {
+  limits.quotas.logBytesPerUser = 1000;
+  serve();
+  TestClient client(path_);
+  TestClient other(path_);
+  EXPECT_EQ(refusalOf(client, messageRequest({{"a", 1}})), "served");
+  EXPECT_EQ(refusalOf(other, messageRequest({{"a", 1}})), "served");
+  running_.onQueue([this] {
+    service_->logBytes = {{1, 600}, {2, 400}};
+    return 0;
+  });
+  const auto use = running_.onQueue([this] { return host_->quotaUse(); });
+  const auto mine = use.get("users").dictionary().get(std::to_string(::getuid())).dictionary();
+  EXPECT_EQ(mine.get("log_bytes").asInt64(), 1000);
+  EXPECT_EQ(mine.get("log_bytes_of_one_connection").asInt64(), 600);
+  EXPECT_EQ(use.get("limits").dictionary().get("log_bytes_per_user").asInt64(), 1000);
+  EXPECT_EQ(refusalOf(other, messageRequest({{"a", 1}})), "over quota: log_bytes 1000 of 1000");
+}
+
 TEST_F(SocketQuotasTest, ConnectionsBeyondAUsersAreAnsweredAndBeyondTwiceThatClosed) {
   limits.quotas.connectionsPerUser = 2;
   serve();

@@ -38,6 +38,24 @@ bool TestClient::send(std::string_view bytes) {
   return true;
 }
 
+bool TestClient::requestWith(std::uint64_t id, const wire::Request& request, int first, int second) {
+  std::string bytes = encoded(id, request);
+  iovec content{.iov_base = bytes.data(), .iov_len = bytes.size()};
+  const int descriptors[] = {first, second};
+  alignas(cmsghdr) char control[CMSG_SPACE(sizeof descriptors)] = {};
+  msghdr message{};
+  message.msg_iov = &content;
+  message.msg_iovlen = 1;
+  message.msg_control = control;
+  message.msg_controllen = sizeof control;
+  cmsghdr* const rights = CMSG_FIRSTHDR(&message);
+  rights->cmsg_level = SOL_SOCKET;
+  rights->cmsg_type = SCM_RIGHTS;
+  rights->cmsg_len = CMSG_LEN(sizeof descriptors);
+  std::memcpy(CMSG_DATA(rights), descriptors, sizeof descriptors);
+  return ::sendmsg(socket_.get(), &message, MSG_NOSIGNAL) == static_cast<ssize_t>(bytes.size());
+}
+
 bool TestClient::request(std::uint64_t id, const wire::Request& request) {
   return send(encoded(id, request));
 }

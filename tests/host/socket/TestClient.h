@@ -25,6 +25,8 @@ class TestClient {
   // Whether all of it went out.
   bool send(std::string_view bytes);
   bool request(std::uint64_t id, const wire::Request& request);
+  // The same with two descriptors on its bytes.
+  bool requestWith(std::uint64_t id, const wire::Request& request, int first, int second);
   // The next reply; nothing when the connection is over or nothing came for a long time.
   std::optional<wire::DecodedReply> reply();
   // Sends the request and takes the next reply.

@@ -1,8 +1,8 @@
 // The log is brought into the database while commits go on, and what fails is left to the writer.
 #include "recorder/store/Checkpointer.h"
 
-#include "tests/recorder/FaultyFiles.h"
 #include "tests/recorder/RecorderFixture.h"
+#include "tests/recorder/faults/FaultyFiles.h"
 
 namespace tarn::recorder {
 namespace {

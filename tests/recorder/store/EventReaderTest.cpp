@@ -2,8 +2,8 @@
 
 #include <sys/stat.h>
 
-#include "tests/recorder/ChildProcess.h"
 #include "tests/recorder/RecorderFixture.h"
+#include "tests/recorder/faults/ChildProcess.h"
 
 namespace tarn::recorder {
 namespace {

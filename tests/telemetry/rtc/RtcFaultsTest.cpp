@@ -1,6 +1,7 @@
 // The Rtc worker on a service that answers late, twice, never, or when nobody is there any more.
 #include <chrono>
 
+#include "telemetry/rtc/TarnReportingRtcMirror.h"
 #include "testing/backends/ReplyFaults.h"
 #include "tests/telemetry/rtc/RtcFixture.h"
 
@@ -43,6 +44,29 @@ TEST_F(RtcFaults, WithoutAListTheSessionIsDropped) {
                             "default Session never started. handleMessage", "default Session never started. stop"}));
   EXPECT_EQ(onlySession().attempts, 0U);
   EXPECT_EQ(onlySession().flushes, 0U);
+}
+
+TEST_F(RtcFaults, AMessageToAWorkerWithoutASessionWaitsForNothing) {
+  platform_.rtcReporting.setBackends({});
+  const auto session = startSession();
+  session->sendMessage(message({{"n", 1}}));  // nothing runs on the private queue
+  EXPECT_EQ(lines().back(), "default Session never started. handleMessage");
+  EXPECT_EQ(count("default Session never started. handleMessage"), 1U);
+  platform_.runUntilIdle();
+  EXPECT_EQ(count("default Session never started. handleMessage"), 1U);
+}
+
+TEST_F(RtcFaults, AMessageWaitsForAStartThatIsStillAhead) {
+  platform_.rtcReporting.setHandsOutTokens(false);
+  const auto mirror = std::make_shared<TarnReportingRtcMirror>(platform_.rtcReporting, 1000);
+  mirror->setStarting();
+  mirror->setStarting();  // after a stop that came before the first had run
+  mirror->start({});
+  EXPECT_TRUE(mirror->isStarting());
+  EXPECT_FALSE(mirror->isInert());
+  mirror->start({});
+  EXPECT_FALSE(mirror->isStarting());
+  EXPECT_TRUE(mirror->isInert());
 }
 
 TEST_F(RtcFaults, AnEmptyListIsAList) {

@@ -1,4 +1,4 @@
-#include "tests/e2e/ServiceFixture.h"
+#include "tests/e2e/support/ServiceFixture.h"
 
 #include <csignal>
 

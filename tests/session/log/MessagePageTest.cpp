@@ -6,6 +6,7 @@
 
 #include "session/TarnReportingSessionMessagePage.h"
 #include "testing/FakePlatform.h"
+#include "tests/support/HeapUse.h"
 
 namespace tarn {
 namespace {
@@ -61,10 +62,46 @@ TEST_F(MessagePage, RecordsComeBackAsTheyWere) {
 TEST_F(MessagePage, TellsItsTimesAndWhetherTheyAreInOrder) {
   const auto at = [](double time) { return record({{"tarnreporting_timestamp", time}}); };
   const auto sorted = pageOf({at(1), at(1), at(3)});
-  EXPECT_EQ(sorted->firstTime(), 1);
-  EXPECT_EQ(sorted->lastTime(), 3);
-  EXPECT_TRUE(sorted->isSorted());
-  EXPECT_FALSE(pageOf({at(1), at(3), at(2)})->isSorted());
+  EXPECT_EQ(sorted->contents().earliest, 1);
+  EXPECT_EQ(sorted->contents().latest, 3);
+  EXPECT_TRUE(sorted->contents().isSorted);
+  const auto unsorted = pageOf({at(2), at(3), at(1)});
+  EXPECT_EQ(unsorted->contents().earliest, 1);
+  EXPECT_EQ(unsorted->contents().latest, 3);
+  EXPECT_FALSE(unsorted->contents().isSorted);
+}
+
+TEST_F(MessagePage, TellsTheKindsThatItMayHave) {
+  const auto of = [](int category) {
+    return std::make_shared<TarnReportingSessionMessage>(
+        plist::Dictionary{{"a", 1}}, static_cast<AudioEventCategory>(category), AudioEventType::State);
+  };
+  const auto has = [](const auto& page, const Record& record) {
+    return page->contents().mayHave([&](TarnReportingSessionMessage::Kind kind) { return kind == record->kind(); });
+  };
+  const auto few = pageOf({of(1), of(2), of(1)});
+  EXPECT_EQ(few->contents().kinds.size(), 2U);
+  EXPECT_TRUE(has(few, of(1)));
+  EXPECT_TRUE(has(few, of(2)));
+  EXPECT_FALSE(has(few, of(3)));
+  std::vector<Record> records;
+  for (int category = 0; category < 65; ++category) {
+    records.push_back(of(category));
+  }
+  const auto many = pageOf(records);
+  EXPECT_TRUE(many->contents().kinds.empty());
+  EXPECT_TRUE(has(many, of(1000)));
+}
+
+TEST_F(MessagePage, InTheStoreItTakesNextToNoMemory) {
+  const Record large = record({{"text", std::string(100'000, 'x')}});
+  const HeapGrowth heap;
+  std::vector<std::shared_ptr<const TarnReportingSessionMessagePage>> pages;
+  for (int count = 0; count < 16; ++count) {
+    pages.push_back(pageOf({large}));
+  }
+  // The store is in memory, here.
+  EXPECT_LT(heap.bytes() - static_cast<std::ptrdiff_t>(platform_.overflow.bytes()), 100'000);
 }
 
 TEST_F(MessagePage, WhatItTakesInTheStoreIsCountedUntilItsEnd) {

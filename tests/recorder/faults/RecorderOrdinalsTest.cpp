@@ -1,7 +1,7 @@
 // Every call that the recorder's files take fails once, each in a life of its own: nothing may be lost, doubled or
 // taken for damage.
-#include "tests/recorder/FaultyFiles.h"
 #include "tests/recorder/RecorderFixture.h"
+#include "tests/recorder/faults/FaultyFiles.h"
 
 namespace tarn::recorder {
 namespace {

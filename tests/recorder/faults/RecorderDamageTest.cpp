@@ -5,8 +5,8 @@
 #include <random>
 
 #include "recorder/store/StoreReport.h"
-#include "tests/recorder/ChildProcess.h"
 #include "tests/recorder/RecorderFixture.h"
+#include "tests/recorder/faults/ChildProcess.h"
 #include "tests/support/Seeds.h"
 
 namespace tarn::recorder {

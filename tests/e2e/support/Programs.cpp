@@ -1,4 +1,4 @@
-#include "tests/e2e/Programs.h"
+#include "tests/e2e/support/Programs.h"
 
 #include <fcntl.h>
 #include <gtest/gtest.h>

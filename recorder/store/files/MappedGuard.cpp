@@ -1,4 +1,4 @@
-#include "recorder/store/MappedGuard.h"
+#include "recorder/store/files/MappedGuard.h"
 
 #include <sqlite3.h>
 #include <sys/mman.h>

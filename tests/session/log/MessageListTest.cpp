@@ -2,15 +2,14 @@
 
 #include <algorithm>
 #include <memory>
-#include <numeric>
 #include <random>
 #include <string>
 #include <vector>
 
 #include "service/vocabulary/ProcessState.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
-#include "session/TarnReportingSessionMessageList.h"
-#include "testing/FakePlatform.h"
+#include "tests/session/log/MessageListFixture.h"
+#include "tests/support/HeapUse.h"
 #include "tests/support/Seeds.h"
 
 namespace tarn {
@@ -18,37 +17,12 @@ namespace {
 
 using namespace testing;
 
-constexpr std::size_t kNoBound = std::size_t{1} << 40U;
-
-class MessageList : public ::testing::Test {
+class MessageList : public MessageListFixture {
  protected:
-  using List = TarnReportingSessionMessageList;
-  using Record = List::Record;
-
-  // Message number n of that time.
-  static Record numbered(int n, double time) {
-    return std::make_shared<TarnReportingSessionMessage>(plist::Dictionary{{"n", n}, {"tarnreporting_timestamp", time}},
-                                                         AudioEventCategory::Playback, AudioEventType::State);
-  }
   static void fill(List& list, int count, int from = 0) {
     for (int n = from; n < from + count; ++n) {
       list.append(numbered(n, n));
     }
-  }
-  static std::vector<std::int64_t> numbers(const List& list) {
-    std::vector<std::int64_t> numbers;
-    for (const Record& record : list) {
-      numbers.push_back(record->message().get("n").asInt64());
-    }
-    return numbers;
-  }
-  static std::vector<std::int64_t> upTo(std::int64_t count) {
-    std::vector<std::int64_t> numbers(static_cast<std::size_t>(count));
-    std::iota(numbers.begin(), numbers.end(), 0);
-    return numbers;
-  }
-  static TarnReportingSessionLogMemory::Usage usage() {
-    return ProcessState::of<TarnReportingSessionLogMemory>()->usage();
   }
   // What one of fill()'s messages takes.
   std::size_t costOfOne() {
@@ -58,8 +32,6 @@ class MessageList : public ::testing::Test {
     fill(first, 1);
     return usage().bytes - withShape;
   }
-
-  FakePlatform platform_;
 };
 
 TEST_F(MessageList, NothingIsMovedWithinTheBound) {
@@ -173,7 +145,7 @@ TEST_F(MessageList, MovingAListMovesWhatItCounts) {
   fill(other, 100, 100);
   EXPECT_EQ(numbers(other), upTo(200));
   EXPECT_EQ(before.overflowing, 1U);
-  other = List();
+  other.clear();
   EXPECT_EQ(usage(), TarnReportingSessionLogMemory::Usage{});
 }
 
@@ -324,6 +296,110 @@ TEST_F(MessageList, SortedPagesAreNotReadForASort) {
   fill(list, 200);
   EXPECT_FALSE(list.sort());
   EXPECT_EQ(platform_.overflow.blocksRead(), 0U);
+}
+
+TEST_F(MessageList, PagesThatNothingFallsIntoAreNotReadForASort) {
+  platform_.overflow.setBounds(2000, kNoBound);
+  List list;
+  for (int n = 1; n < 200; ++n) {
+    list.append(numbered(n, n));
+  }
+  list.append(numbered(0, 0.5));  // as the marker of a stop may be
+  EXPECT_TRUE(list.sort());
+  EXPECT_EQ(platform_.overflow.blocksRead(), 0U);
+  EXPECT_EQ(numbers(list), upTo(200));
+}
+
+TEST_F(MessageList, OnlyThePageThatAMessageFallsIntoIsReadForASort) {
+  platform_.overflow.setBounds(2000, kNoBound);
+  List list;
+  for (int n = 0; n < 200; ++n) {
+    if (n != 50) {
+      list.append(numbered(n, n));
+    }
+  }
+  list.append(numbered(50, 50));
+  EXPECT_TRUE(list.sort());
+  EXPECT_LE(platform_.overflow.blocksRead(), 1U);
+  EXPECT_EQ(numbers(list), upTo(200));
+}
+
+TEST_F(MessageList, MessagesALittleOutOfOrderAreSortedInOnePass) {
+  platform_.overflow.setBounds(2000, kNoBound);
+  List list;
+  for (int n = 0; n < 1000; n += 2) {
+    list.append(numbered(n + 1, n + 1));
+    list.append(numbered(n, n));
+  }
+  const std::size_t blocks = platform_.overflow.blocks();
+  EXPECT_TRUE(list.sort());
+  EXPECT_LE(platform_.overflow.blocksRead(), blocks);
+  EXPECT_EQ(numbers(list), upTo(1000));
+}
+
+TEST_F(MessageList, SortTakesNoMoreMemoryThanAFewPages) {
+  constexpr std::size_t kText = 1000;
+  platform_.overflow.setBounds(64 * kText, kNoBound);
+  List list;
+  const std::string text(kText, 'x');
+  for (int n = 0; n < 4000; ++n) {
+    const double time = n % 2 == 0 ? n : 4000 - n;  // each page overlaps with each
+    list.append(std::make_shared<TarnReportingSessionMessage>(
+        plist::Dictionary{{"n", n}, {"text", text}, {"tarnreporting_timestamp", time}}, AudioEventCategory::Playback,
+        AudioEventType::State));
+  }
+  ASSERT_GT(list.overflowed(), 3900U);
+  std::size_t most = 0;
+  platform_.overflow.setOnWrite([&](std::size_t kept) { most = std::max(most, heapBytes() - kept); });
+  const std::size_t before = heapBytes() - platform_.overflow.bytes();
+  EXPECT_TRUE(list.sort());
+  platform_.overflow.setOnWrite(nullptr);
+  EXPECT_LT(most - before, 2'000'000U);  // of 4 MB
+  EXPECT_EQ(list.size(), 4000U);
+}
+
+TEST_F(MessageList, SortWithoutRoomInTheStoreKeepsAllInMemory) {
+  platform_.overflow.setBounds(2000, kNoBound);
+  List list;
+  fill(list, 200);
+  platform_.overflow.setFull(true);
+  list.append(numbered(-1, 50.5));
+  list.append(numbered(-2, -1));
+  EXPECT_TRUE(list.sort());
+  auto expected = upTo(200);
+  expected.insert(expected.begin() + 51, -1);
+  expected.insert(expected.begin(), -2);
+  EXPECT_EQ(numbers(list), expected);
+}
+
+TEST_F(MessageList, WithoutARecordItHasNoMemoryOfItsOwn) {
+  std::vector<List> lists(1000);
+  const HeapGrowth heap;
+  for (std::int64_t id = 0; List & list : lists) {
+    list = List(++id);
+    list.sort();
+    list.clear();
+  }
+  EXPECT_LT(heap.bytes(), 50'000);
+}
+
+TEST_F(MessageList, GoingBackPassesOverPagesWithoutTheKinds) {
+  platform_.overflow.setBounds(2000, kNoBound);
+  List list;
+  list.append(std::make_shared<TarnReportingSessionMessage>(plist::Dictionary{{"n", -1}}, AudioEventCategory::Setup,
+                                                            AudioEventType::Start));
+  fill(list, 200);
+  const auto wanted = TarnReportingSessionMessage::kindOf(AudioEventCategory::Setup, AudioEventType::Start);
+  std::vector<std::size_t> found;
+  list.goBack([&](TarnReportingSessionMessage::Kind kind) { return kind == wanted; },
+              [&](std::size_t index, const Record& record) {
+                if (record->kind() == wanted) {
+                  found.push_back(index);
+                }
+                return true;
+              });
+  EXPECT_EQ(found, std::vector<std::size_t>{0});
+  EXPECT_EQ(platform_.overflow.blocksRead(), 1U);
 }
 
 TEST_F(MessageList, RecentMessageThatIsOlderThanThePagesIsSortedIn) {

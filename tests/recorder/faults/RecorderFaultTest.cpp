@@ -7,8 +7,8 @@
 #include <cerrno>
 #include <string_view>
 
-#include "tests/recorder/ChildProcess.h"
 #include "tests/recorder/RecorderFixture.h"
+#include "tests/recorder/faults/ChildProcess.h"
 
 namespace tarn::recorder {
 namespace {
@@ -213,7 +213,7 @@ TEST_F(RecorderFault, AFileThatMayNotGrowIsWrittenOnWhenItMay) {
     ASSERT_EQ(::setrlimit(RLIMIT_FSIZE, &limit), 0);
     start();
     recordMany(4000, 1000);
-    ASSERT_TRUE(eventually([&] { return errors() == 1; }));
+    ASSERT_TRUE(eventually([&] { return errors() >= 1; }));
     EXPECT_FALSE(recorder_->flush(std::chrono::milliseconds(200)));
     limit.rlim_cur = before;
     ASSERT_EQ(::setrlimit(RLIMIT_FSIZE, &limit), 0);

@@ -4,8 +4,8 @@
 #include <atomic>
 #include <new>
 
-#include "tests/recorder/ChildProcess.h"
 #include "tests/recorder/RecorderFixture.h"
+#include "tests/recorder/faults/ChildProcess.h"
 
 namespace tarn::recorder {
 namespace {

@@ -1,4 +1,4 @@
-#include "tests/recorder/FaultyFiles.h"
+#include "tests/recorder/faults/FaultyFiles.h"
 
 #include <cstring>
 #include <new>

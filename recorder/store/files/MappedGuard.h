@@ -14,12 +14,15 @@ namespace tarn::recorder {
 
 class MappedGuard {
  public:
-  // Guards a mapping until forget(); false when there are too many.
+  // Guards a mapping until forget(); false when there are too many (1024). Installs the signal's handler the first
+  // time.
   static bool guard(void* memory, std::size_t size) noexcept;
+  // Before it is unmapped. Memory that isn't guarded is no fault.
   static void forget(void* memory) noexcept;
   // From now on SQLite's mappings are guarded. Once is enough; safe to repeat.
   static void guardSqlite() noexcept;
-  // How many times a guarded page was gone, since the start of the process.
+  // How many times a guarded page was gone, since the start of the process; whoever remembers it from before knows
+  // whether that happened since, to anybody's mapping.
   static std::uint64_t torn() noexcept;
 };
 

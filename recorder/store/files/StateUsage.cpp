@@ -1,4 +1,4 @@
-#include "recorder/store/StateUsage.h"
+#include "recorder/store/files/StateUsage.h"
 
 #include <sys/stat.h>
 #include <sys/sysmacros.h>
@@ -77,7 +77,8 @@ std::vector<std::string> StateUsage::tidy() {
 }
 
 std::int64_t StateUsage::databaseBytes(std::int64_t logBytes) const noexcept {
-  return std::max(cap_ - beside_ - logBytes, cap_ / kLeastShare);
+  const std::int64_t others = others_ ? others_->load() : 0;
+  return std::max(cap_ - beside_ - others - logBytes, cap_ / kLeastShare);
 }
 
 // A line of the kernel's: "1: POSIX  ADVISORY  READ 1234 fd:01:5678 123 127".

@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-#include "tests/e2e/Programs.h"
+#include "tests/e2e/support/Programs.h"
 
 namespace tarn::e2e {
 

@@ -12,7 +12,7 @@
 #include <string>
 #include <string_view>
 
-#include "tests/e2e/Programs.h"
+#include "tests/e2e/support/Programs.h"
 
 namespace tarn::e2e {
 

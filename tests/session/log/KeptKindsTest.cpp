@@ -1,0 +1,170 @@
+// The look-up of the newest message of a kind, when messages lie in pages: what is read back, and what is kept of it.
+#include <gtest/gtest.h>
+
+#include <cstdint>
+#include <memory>
+#include <utility>
+
+#include "session/TarnReportingSessionMessageLog.h"
+#include "tests/session/log/MessageListFixture.h"
+
+namespace tarn {
+namespace {
+
+using namespace testing;
+
+constexpr int kMostKept = 256;
+
+class KeptKinds : public KilobyteLists {
+ protected:
+  // Every message is moved, into a page of its own.
+  KeptKinds() {
+    setBounds(1, kNoBound);
+    firstPlace_ = store_.places().size();
+  }
+
+  static std::shared_ptr<TarnReportingSessionMessage> ofKind(int kind, int n, double time = 0) {
+    return std::make_shared<TarnReportingSessionMessage>(plist::Dictionary{{"n", n}, {"tarnreporting_timestamp", time}},
+                                                         static_cast<AudioEventCategory>(kind), AudioEventType::State);
+  }
+  // One message each, numbered as its kind.
+  void addKinds(int from, int to) {
+    for (int kind = from; kind < to; ++kind) {
+      log_.append(ofKind(kind, kind));
+    }
+  }
+  // The number of the newest of that kind; -1 when there is none.
+  std::int64_t look(int kind) const {
+    const TarnReportingSessionMessage* const newest =
+        log_.newest(static_cast<AudioEventCategory>(kind), AudioEventType::State);
+    return newest == nullptr ? -1 : newest->message().get("n").asInt64();
+  }
+  // How many pages that takes.
+  std::size_t readsOf(int from, int to) const {
+    const std::size_t before = platform_.overflow.blocksRead();
+    for (int kind = from; kind < to; ++kind) {
+      EXPECT_EQ(look(kind), kind);
+    }
+    return platform_.overflow.blocksRead() - before;
+  }
+  // Looks all up, and again: then what is kept takes no reading. The kinds are more than are kept.
+  void expectMostKept(int from, int to) const {
+    readsOf(from, to);
+    EXPECT_EQ(readsOf(from, to), static_cast<std::size_t>(to - from - kMostKept));
+  }
+  void change(std::size_t index, int n) {
+    log_.messages().change(index, [n](TarnReportingSessionMessage& message) { message.mutableMessage().set("n", n); });
+  }
+
+  TarnReportingSessionMessageLog log_{4711};
+  std::size_t firstPlace_ = 0;
+};
+
+TEST_F(KeptKinds, SoManyAreKeptAndNoMore) {
+  addKinds(0, 300);
+  EXPECT_EQ(readsOf(0, 300), 300U);
+  EXPECT_EQ(readsOf(0, 300), 44U);
+}
+
+TEST_F(KeptKinds, KindWithANewerMessageMakesRoomForAnother) {
+  addKinds(0, kMostKept);
+  readsOf(0, kMostKept);
+  for (int kind = 0; kind < 10; ++kind) {
+    log_.append(ofKind(kind, kind));
+  }
+  addKinds(kMostKept, kMostKept + 10);
+  readsOf(kMostKept, kMostKept + 10);
+  EXPECT_EQ(readsOf(10, kMostKept + 10), 0U);
+}
+
+TEST_F(KeptKinds, AfterAClearAsManyAreKeptAgain) {
+  addKinds(0, 300);
+  readsOf(0, 300);
+  log_.clear();
+  addKinds(300, 600);
+  expectMostKept(300, 600);
+}
+
+TEST_F(KeptKinds, AfterASortAsManyAreKeptAgain) {
+  addKinds(0, 300);
+  readsOf(0, 300);
+  log_.append(ofKind(300, 300, -1));
+  log_.sort();
+  expectMostKept(0, 301);
+}
+
+TEST_F(KeptKinds, AfterAChangeInPlaceAsManyAreKeptAgain) {
+  addKinds(0, 300);
+  readsOf(0, 300);
+  change(0, 0);
+  expectMostKept(0, 300);
+}
+
+TEST_F(KeptKinds, ChangeOfAMessageThatWasReadAgainIsSeen) {
+  addKinds(0, 5);
+  readsOf(0, 5);  // all are kept, and the page of the first isn't at hand any more
+  change(0, 7);
+  readsOf(1, 5);
+  EXPECT_EQ(look(0), 7);
+}
+
+TEST_F(KeptKinds, LostMessagesTakeNoRoom) {
+  addKinds(0, 2 * kMostKept);
+  for (std::size_t place = 0; place < kMostKept; ++place) {
+    store_.lose(store_.places()[firstPlace_ + place]);
+  }
+  for (int kind = 0; kind < kMostKept; ++kind) {
+    EXPECT_EQ(look(kind), -1);
+  }
+  EXPECT_EQ(usage().lost, static_cast<std::uint64_t>(kMostKept));
+  readsOf(kMostKept, 2 * kMostKept);
+  EXPECT_EQ(readsOf(kMostKept, 2 * kMostKept), 0U);
+}
+
+TEST_F(KeptKinds, SortOfALogInOrderReadsNothing) {
+  addKinds(0, 20);
+  log_.sort();
+  EXPECT_EQ(platform_.overflow.blocksRead(), 0U);
+}
+
+TEST_F(KeptKinds, KindOfWhichNothingIsLeftAfterASortIsNotFound) {
+  log_.append(ofKind(0, 0, 2));
+  log_.append(ofKind(1, 1, 1));
+  log_.append(ofKind(2, 2, 3));
+  store_.lose(store_.places()[firstPlace_ + 2]);
+  log_.sort();
+  EXPECT_EQ(look(0), 0);
+  EXPECT_EQ(look(1), 1);
+  EXPECT_EQ(look(2), -1);
+}
+
+TEST_F(KeptKinds, FirstMessageInMemoryIsLetGoWhenItIsMoved) {
+  setBounds(8 * kKilobyte, kNoBound);
+  TarnReportingSessionMessageLog log(4711);
+  for (int n = 0; n < 8; ++n) {
+    log.append(kilobyte(n, n));
+  }
+  auto ninth = std::make_shared<TarnReportingSessionMessage>(kilobyte(8, 8)->message(),
+                                                             static_cast<AudioEventCategory>(1), AudioEventType::State);
+  const std::weak_ptr<TarnReportingSessionMessage> record = ninth;
+  log.append(std::move(ninth));
+  for (int n = 9; n < 16; ++n) {
+    log.append(kilobyte(n, n));
+  }
+  ASSERT_EQ(log.messages().overflowed(), 8U);  // it is the first in memory
+  EXPECT_EQ(log.newest(static_cast<AudioEventCategory>(1), AudioEventType::State), record.lock().get());
+  log.append(kilobyte(16, 16));
+  EXPECT_TRUE(record.expired());
+}
+
+TEST_F(KeptKinds, ClearLetsGoWhatWasLookedUp) {
+  addKinds(0, 1);
+  EXPECT_EQ(look(0), 0);
+  const std::weak_ptr<TarnReportingSessionMessage> record = log_.messages()[0];
+  EXPECT_FALSE(record.expired());
+  log_.clear();
+  EXPECT_TRUE(record.expired());
+}
+
+}  // namespace
+}  // namespace tarn

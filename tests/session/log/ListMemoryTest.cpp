@@ -1,0 +1,281 @@
+// The bounds of the lists' memory, and who gives way.
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <memory>
+#include <new>
+#include <optional>
+#include <random>
+#include <string>
+#include <vector>
+
+#include "tests/session/log/MessageListFixture.h"
+#include "tests/support/Seeds.h"
+
+namespace tarn {
+namespace {
+
+using namespace testing;
+
+constexpr std::string_view kNoRoom = "no room for messages beyond the bound of the logs, they stay in memory: ";
+
+class ListMemory : public KilobyteLists {};
+
+TEST_F(ListMemory, BoundOfASessionHoldsToTheByte) {
+  setBounds(16 * kKilobyte, kNoBound);
+  List list;
+  fill(list, 16);
+  EXPECT_EQ(list.overflowed(), 0U);
+  fill(list, 1, 16);
+  EXPECT_EQ(list.overflowed(), 2U);
+  EXPECT_EQ(usage().bytes, 15 * kKilobyte);
+}
+
+TEST_F(ListMemory, BoundOfAllHoldsToTheByte) {
+  setBounds(64 * kKilobyte, 16 * kKilobyte);
+  List one;
+  List other;
+  fill(one, 8);
+  fill(other, 8);
+  EXPECT_EQ(platform_.overflow.writesTried(), 0U);
+  fill(other, 1, 8);
+  EXPECT_EQ(other.overflowed(), 8U);
+  EXPECT_EQ(usage().bytes, 9 * kKilobyte);
+}
+
+TEST_F(ListMemory, AllThatIsTooMuchIsMovedAtOnce) {
+  setBounds(64 * kKilobyte, 32 * kKilobyte);
+  List list;
+  fill(list, 32);
+  List other;
+  other.append(sized(20 * kKilobyte, 0, 0));
+  EXPECT_LE(usage().bytes, 32 * kKilobyte);
+  EXPECT_EQ(numbers(list), upTo(32));
+}
+
+TEST_F(ListMemory, EveryKeyOfANewShapeIsCounted) {
+  List list;
+  list.append(std::make_shared<TarnReportingSessionMessage>(
+      plist::Dictionary{{std::string(5000, 'k'), 1}, {std::string(3000, 'l'), 1}}, AudioEventCategory::Playback,
+      AudioEventType::State));
+  EXPECT_GT(usage().bytes, 8000U);
+}
+
+TEST_F(ListMemory, ListThatIsGoneThroughIsPassedOver) {
+  setBounds(64 * kKilobyte, 16 * kKilobyte);
+  List list;
+  fill(list, 12);
+  List other;
+  for ([[maybe_unused]] const Record& record : list) {
+    if (other.empty()) {
+      fill(other, 5);
+    }
+  }
+  EXPECT_EQ(list.overflowed(), 0U);
+  EXPECT_EQ(other.overflowed(), 5U);
+  EXPECT_EQ(usage().bytes, 12 * kKilobyte);
+}
+
+TEST_F(ListMemory, WhenNoListCanGiveAnythingMessagesStay) {
+  setBounds(64 * kKilobyte, 16 * kKilobyte);
+  List list;
+  fill(list, 16);
+  const auto at = list.begin();
+  fill(list, 1, 16);
+  EXPECT_EQ(numberOf(*at), 0);
+  EXPECT_EQ(list.overflowed(), 0U);
+  EXPECT_EQ(usage().bytes, 17 * kKilobyte);
+}
+
+TEST_F(ListMemory, LoopThatEndedHoldsNothingBack) {
+  setBounds(16 * kKilobyte, kNoBound);
+  List list;
+  fill(list, 16);
+  EXPECT_EQ(numbers(list), upTo(16));
+  fill(list, 1, 16);
+  EXPECT_EQ(list.overflowed(), 2U);
+}
+
+TEST_F(ListMemory, FullStoreIsTriedOnceForAllLists) {
+  setBounds(64 * kKilobyte, 8 * kKilobyte);
+  platform_.overflow.setFull(true);
+  std::vector<List> lists(4);
+  for (List& list : lists) {
+    fill(list, 3);
+  }
+  EXPECT_EQ(platform_.overflow.writesTried(), 1U);
+  EXPECT_EQ(usage().bytes, 12 * kKilobyte);
+}
+
+TEST_F(ListMemory, FullStoreIsTriedAgainAtTheMebibyteAndToldOnce) {
+  setBounds(16 * kKilobyte, kNoBound);
+  platform_.overflow.setFull(true);
+  List list;
+  fill(list, 17);
+  EXPECT_EQ(platform_.overflow.writesTried(), 1U);
+  fill(list, 1023, 17);
+  EXPECT_EQ(platform_.overflow.writesTried(), 1U);
+  fill(list, 1, 1040);
+  EXPECT_EQ(platform_.overflow.writesTried(), 2U);
+  EXPECT_EQ(usage().failures, 2U);
+  EXPECT_EQ(platform_.log.count(kNoRoom), 1U);
+}
+
+TEST_F(ListMemory, FailureAfterASuccessIsToldAgain) {
+  setBounds(16 * kKilobyte, kNoBound);
+  List list;
+  for (int turn = 0; turn < 2; ++turn) {
+    platform_.overflow.setFull(true);
+    fill(list, 17);
+    platform_.overflow.setFull(false);
+    fill(list, 1024);
+    EXPECT_LE(usage().bytes, 16 * kKilobyte);
+  }
+  EXPECT_EQ(platform_.log.count(kNoRoom), 2U);
+  EXPECT_EQ(platform_.log.count("there is room again"), 2U);
+}
+
+TEST_F(ListMemory, MemoryThatIsGivenBackBringsTheNextTryNearer) {
+  const auto fillLarge = [](List& list) {
+    for (int n = 0; n < 65; ++n) {
+      list.append(sized(32 * kKilobyte, n, n));
+    }
+  };
+  setBounds(2048 * kKilobyte, kNoBound);
+  platform_.overflow.setFull(true);
+  List list;
+  fillLarge(list);
+  EXPECT_EQ(platform_.overflow.writesTried(), 1U);
+  list.clear();
+  platform_.overflow.setFull(false);
+  fillLarge(list);
+  EXPECT_EQ(platform_.overflow.writesTried(), 2U);
+  EXPECT_EQ(list.overflowed(), 4U);
+}
+
+TEST_F(ListMemory, MemoryThatEndsInTheMiddleOfAMoveIsAFailureLikeOthers) {
+  setBounds(16 * kKilobyte, kNoBound);
+  store_.setWatch([](WatchedStore::Call) { throw std::bad_alloc(); });
+  List list;
+  fill(list, 100);
+  store_.setWatch(nullptr);
+  EXPECT_EQ(numbers(list), upTo(100));
+  EXPECT_EQ(usage().bytes, 100 * kKilobyte);
+  EXPECT_EQ(usage().failures, 1U);
+  EXPECT_EQ(platform_.log.messages(), (std::vector<std::string>{std::string(kNoRoom) + "out of memory"}));
+}
+
+TEST_F(ListMemory, MovedListIsFoundAsTheLargest) {
+  setBounds(64 * kKilobyte, 16 * kKilobyte);
+  List large;
+  fill(large, 12);
+  const List moved(std::move(large));
+  List other;
+  fill(other, 5);
+  EXPECT_EQ(moved.overflowed(), 8U);
+  EXPECT_EQ(other.overflowed(), 0U);
+  EXPECT_EQ(numbers(moved), upTo(12));
+}
+
+TEST_F(ListMemory, MovedListKeepsItsReporterItsAccountAndItsChunks) {
+  setBounds(16 * kKilobyte, kNoBound);
+  const auto account = std::make_shared<TarnReportingSessionLogAccount>();
+  {
+    List list(4711);
+    list.setAccount(account);
+    fill(list, 15);
+    List moved(std::move(list));
+    fill(moved, 2, 15);
+    EXPECT_EQ(moved.overflowed(), 2U);
+    EXPECT_EQ(account->bytes, 15 * kKilobyte);
+    EXPECT_EQ(numbers(moved), upTo(17));
+  }
+  EXPECT_EQ(account->bytes, 0U);
+  EXPECT_EQ(usage(), TarnReportingSessionLogMemory::Usage{});
+  ASSERT_EQ(platform_.log.messages().size(), 1U);
+  EXPECT_NE(platform_.log.messages()[0].find("reporterID=4711 messages=17 "), std::string::npos);
+}
+
+TEST_F(ListMemory, ListThatWasMovedFromIsAsNew) {
+  setBounds(16 * kKilobyte, kNoBound);
+  List list(4711);
+  fill(list, 18);
+  const List moved(std::move(list));
+  EXPECT_TRUE(list.empty());  // NOLINT(bugprone-use-after-move): that is what is asked
+  fill(list, 18);
+  EXPECT_EQ(list.overflowed(), 2U);
+  EXPECT_EQ(numbers(list), upTo(18));
+  EXPECT_EQ(numbers(moved), upTo(18));
+  EXPECT_EQ(platform_.log.count("the log has no more room in memory"), 2U);
+}
+
+TEST_F(ListMemory, AssignedListHasWhatTheOtherHadAndNothingElse) {
+  setBounds(16 * kKilobyte, kNoBound);
+  List list;
+  fill(list, 40);
+  List other;
+  fill(other, 20);
+  list = std::move(other);
+  EXPECT_EQ(numbers(list), upTo(20));
+  EXPECT_EQ(usage().bytes, 16 * kKilobyte);
+  EXPECT_EQ(usage().overflowing, 1U);
+}
+
+// Whoever gives way is at least half as large as the largest, whatever became of the lists before.
+TEST_F(ListMemory, LargeListsGiveWayInAnyLife) {
+  for (const std::uint64_t seed : testSeeds(1)) {
+    SCOPED_TRACE(seedNote(seed));
+    std::mt19937 random(static_cast<std::mt19937::result_type>(seed));
+    setBounds(64 * kKilobyte, 100 * kKilobyte);
+    struct Counted {
+      std::optional<List> list;
+      std::shared_ptr<TarnReportingSessionLogAccount> account = std::make_shared<TarnReportingSessionLogAccount>();
+      std::size_t bytesAtWrite = 0;
+      std::size_t overflowed = 0;
+    };
+    std::vector<Counted> lists(12);
+    int writes = 0;
+    store_.setWatch([&](WatchedStore::Call) {
+      ++writes;
+      for (Counted& each : lists) {
+        each.bytesAtWrite = each.account->bytes;
+      }
+    });
+    const std::size_t before = platform_.overflow.written();
+    for (int step = 0; step < 3000; ++step) {
+      Counted& one = lists[random() % lists.size()];
+      const auto deed = random() % 40;
+      if (!one.list || deed == 0) {
+        one.list.emplace();
+        one.list->setAccount(one.account);
+      } else if (deed == 1) {
+        one.list->clear();
+      } else if (deed == 2) {
+        List taken(std::move(*one.list));
+        one.list.emplace(std::move(taken));
+      }
+      for (Counted& each : lists) {
+        each.overflowed = each.list ? each.list->overflowed() : 0;
+      }
+      writes = 0;
+      fill(*one.list, 1, step);
+      ASSERT_LE(usage().bytes, 100 * kKilobyte);
+      ASSERT_LE(writes, 1);
+      if (writes == 0) continue;
+      std::size_t largest = 0;
+      for (const Counted& each : lists) {
+        largest = std::max(largest, each.bytesAtWrite);
+      }
+      for (const Counted& each : lists) {
+        if (each.list && each.list->overflowed() != each.overflowed) {
+          ASSERT_GE(2 * each.bytesAtWrite, largest);
+        }
+      }
+    }
+    EXPECT_GT(platform_.overflow.written(), before + 100);
+    store_.setWatch(nullptr);
+  }
+}
+
+}  // namespace
+}  // namespace tarn

@@ -1,0 +1,126 @@
+// Sorting a list of which a part lies in the store.
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "tests/session/log/MessageListFixture.h"
+
+namespace tarn {
+namespace {
+
+using namespace testing;
+
+constexpr std::string_view kToldOverflow = "the log has no more room in memory";
+
+class ListSort : public KilobyteLists {
+ protected:
+  // Pages of one message each.
+  ListSort() { setBounds(8 * kKilobyte, kNoBound); }
+};
+
+TEST_F(ListSort, EqualTimesAreInOrder) {
+  List list;
+  for (int n = 0; n < 20; ++n) {
+    list.append(kilobyte(n, 5));
+  }
+  EXPECT_FALSE(list.sort());
+  EXPECT_EQ(platform_.overflow.blocksRead(), 0U);
+}
+
+TEST_F(ListSort, MessagesInMemoryThatAreLaterThanThePagesAreSortedToo) {
+  List list;
+  fill(list, 20);
+  list.append(kilobyte(21, 21));
+  list.append(kilobyte(20, 20));
+  EXPECT_TRUE(list.sort());
+  EXPECT_EQ(numbers(list), upTo(22));
+}
+
+TEST_F(ListSort, WithoutRoomNothingIsLost) {
+  List list;
+  fillBackwards(list, 20);
+  platform_.overflow.setFull(true);
+  for (int n = 20; n < 30; ++n) {
+    list.append(kilobyte(n, 1000 - n));
+  }
+  EXPECT_TRUE(list.sort());
+  EXPECT_EQ(numbers(list), downFrom(30));
+}
+
+TEST_F(ListSort, OverflowIsNotToldAgain) {
+  List list(4711);
+  fillBackwards(list, 20);
+  EXPECT_TRUE(list.sort());
+  EXPECT_EQ(platform_.log.count(kToldOverflow), 1U);
+  List moved(std::move(list));
+  fillBackwards(moved, 20);
+  EXPECT_TRUE(moved.sort());
+  EXPECT_EQ(platform_.log.count(kToldOverflow), 1U);
+}
+
+TEST_F(ListSort, ChangeThatWasNotWrittenYetStays) {
+  List list;
+  fillBackwards(list, 20);
+  list.change(0, [](TarnReportingSessionMessage& message) { message.mutableMessage().set("n", -1); });
+  EXPECT_TRUE(list.sort());
+  EXPECT_EQ(numberOf(list.back()), -1);
+}
+
+TEST_F(ListSort, ManyPagesInNoOrderAreSortedWithoutFillingTheMemory) {
+  setBounds(16 * kKilobyte, kNoBound);  // pages of two, which overlap
+  List list;
+  for (int n = 0; n < 300; ++n) {
+    list.append(kilobyte(n, n * 149 % 300));
+  }
+  std::size_t mostBlocks = 0;
+  store_.setWatch([&](WatchedStore::Call) { mostBlocks = std::max(mostBlocks, platform_.overflow.blocks()); });
+  EXPECT_TRUE(list.sort());
+  store_.setWatch(nullptr);
+  std::vector<std::int64_t> expected(300);
+  for (int n = 0; n < 300; ++n) {
+    expected[static_cast<std::size_t>(n * 149 % 300)] = n;
+  }
+  EXPECT_EQ(numbers(list), expected);
+  EXPECT_LE(usage().bytes, 16 * kKilobyte);
+  EXPECT_LE(mostBlocks, 300U);
+}
+
+TEST_F(ListSort, WhatCanNotBeReadBackOnTheWayIsLeftOut) {
+  setBounds(16 * kKilobyte, kNoBound);
+  List list;
+  for (int n = 0; n < 300; ++n) {
+    list.append(kilobyte(n, n * 149 % 300));
+  }
+  const std::size_t written = store_.places().size();
+  store_.setWatch([&](WatchedStore::Call) {
+    if (store_.places().size() == written + 20) {
+      store_.lose(store_.places().back());
+    }
+  });
+  EXPECT_TRUE(list.sort());
+  store_.setWatch(nullptr);
+  std::vector<std::int64_t> places;
+  for (const std::int64_t n : numbers(list)) {
+    places.push_back(n * 149 % 300);
+  }
+  EXPECT_TRUE(std::is_sorted(places.begin(), places.end()));
+  EXPECT_EQ(places.size() + usage().lost, 300U);
+  EXPECT_EQ(usage().lost, 2U);
+}
+
+TEST_F(ListSort, PageThatIsLostIsGoneAfterwards) {
+  List list;
+  fill(list, 20);
+  store_.lose(store_.places().front());
+  EXPECT_EQ(numbers(list).size(), 19U);
+  EXPECT_EQ(list.size(), 20U);
+  EXPECT_TRUE(list.sort());
+  EXPECT_EQ(list.size(), 19U);
+  EXPECT_EQ(usage().lost, 1U);
+}
+
+}  // namespace
+}  // namespace tarn
