@@ -7,6 +7,7 @@
 #include <unistd.h>
 
 #include <chrono>
+#include <cstdint>
 #include <cstdlib>
 #include <fstream>
 
@@ -18,6 +19,8 @@ namespace tarn::bench {
 namespace {
 
 constexpr double kReadySeconds = 20;
+// Whatever is streamed is logged in memory: how much a message takes there is one of the figures.
+constexpr std::uint64_t kLogBytes = std::uint64_t{1} << 36U;
 
 }  // namespace
 
@@ -44,7 +47,12 @@ void ServiceProcess::writeConfiguration(const ServiceSetup& setup) const {
   std::ofstream file(directory_.path() + "/config.toml");
   file << "[tally]\nin_use = [" << (setup.recordsEvents ? "\"*\"" : "") << "]\n"
        << "[rtc]\navailable = " << (setup.mirrorsSessions ? "true" : "false") << '\n'
-       << "[recorder]\nmax_megabytes = " << setup.maxMegabytes << '\n';
+       << "[recorder]\nmax_megabytes = " << setup.maxMegabytes << '\n'
+       << "[limits]\n";
+  for (const char* const bound :
+       {"log_bytes_per_session", "log_bytes", "log_bytes_per_connection", "log_bytes_per_user"}) {
+    file << bound << " = " << kLogBytes << '\n';
+  }
 }
 
 void ServiceProcess::start() {

@@ -241,7 +241,7 @@ TEST_F(Ctl, QuotasAreToldBeforeTheyAreUsedUpAndRefusalsNameThem) {
   ASSERT_TRUE(client->call(client::createReportingSession(2)).ok());
   const std::string text = ctl({"status", "--quotas"}).output;
   EXPECT_NE(text.find("sessions_per_connection 2\n"), std::string::npos) << text;
-  EXPECT_NE(text.find("uid " + std::to_string(::getuid()) + ": connections 2 sessions 2 waiting_bytes 0\n"),
+  EXPECT_NE(text.find("uid " + std::to_string(::getuid()) + ": connections 2 sessions 2 waiting_bytes 0 log_bytes "),
             std::string::npos)
       << text;
   const json quotas = json::parse(ctl({"status", "--quotas", "--json"}).output);

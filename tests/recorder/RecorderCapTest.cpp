@@ -1,6 +1,8 @@
 // The cap holds for all that the recorder keeps and for the folders that it is told of.
 #include <fcntl.h>
 
+#include <atomic>
+
 #include "recorder/store/files/StateUsage.h"
 #include "tests/recorder/RecorderFixture.h"
 #include "tests/recorder/faults/ChildProcess.h"
@@ -47,6 +49,17 @@ TEST_P(RecorderCap, AllFilesTogetherStayWithinIt) {
 }
 
 INSTANTIATE_TEST_SUITE_P(Sizes, RecorderCap, ::testing::Values(2, 8));
+
+TEST_F(RecorderCap, WhatOthersKeepCountsAsItIsNow) {
+  const auto others = std::make_shared<std::atomic<std::int64_t>>(0);
+  StateUsage usage(file(), {}, 8 * kMegabyte, others);
+  usage.tidy();
+  const std::int64_t before = usage.databaseBytes(0);
+  *others = kMegabyte;
+  EXPECT_EQ(usage.databaseBytes(0), before - kMegabyte);
+  *others = 0;
+  EXPECT_EQ(usage.databaseBytes(0), before);
+}
 
 TEST_F(RecorderCap, OfFilesSetAsideTheFirstIsKeptLongest) {
   options_.maxMegabytes = 4;
