@@ -58,10 +58,9 @@ void TarnReportingSessionMessage::sortMessages(TarnReportingSessionMessages& mes
   std::iota(order.begin(), order.end(), 0U);
   std::stable_sort(order.begin(), order.end(),
                    [&](std::uint32_t left, std::uint32_t right) { return times[left] < times[right]; });
-  TarnReportingSessionMessages sorted;
-  for (const std::uint32_t index : order) {
-    sorted.push_back(std::move(messages[index]));
-  }
+  TarnReportingSessionMessages sorted(messages.size());  // all that is needed, before one is moved
+  std::transform(order.begin(), order.end(), sorted.begin(),
+                 [&](std::uint32_t index) { return std::move(messages[index]); });
   messages.swap(sorted);
 }
 

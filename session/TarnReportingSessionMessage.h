@@ -75,7 +75,7 @@ class TARN_CAPABILITY TarnReportingSessionMessage {
   // What records are sorted by: the time stamp, 0 when it is missing or no number.
   double sortingTime() const noexcept;
   // Sorts in place and stably by epoch time; records without a time stamp count as 0. One look when they are in order
-  // already, which is the rule.
+  // already, which is the rule. Without the memory for it nothing has changed.
   static void sortMessages(TarnReportingSessionMessages& messages);
 
   // The record's own guard (BasicLockable), for changes to a record that a worker may still hold. A flag and not a

@@ -54,10 +54,10 @@ class TarnReportingSessionMessageList {
   // Then moves the oldest messages of this list or of the largest one to the store, when a bound is exceeded. A store
   // that fails loses nothing: the record is in the list in any case. Without the memory for it nothing has changed.
   void append(Record record);
-  // Sorts by time stamp (TarnReportingSessionMessage::sortMessages); false when nothing had to be moved for sure. What
-  // couldn't be read back is gone then. In memory alone it is one pass when the list is in order, which is the rule. So
-  // it is with pages that tell by their times that they are in order: none of them is read. Else it cuts the list into
-  // sorted runs of 64 chunks and merges them, an earlier run first where times are equal, so that it stays stable.
+  // Sorts by time stamp (TarnReportingSessionMessage::sortMessages) and stably; false when nothing had to be moved for
+  // sure. What couldn't be read back is gone then. A list in order costs one pass, of pages over their times alone.
+  // Else runs of pages are merged; see the source. When memory is missing for it, a list without pages is as it was,
+  // and one with pages keeps what was merged by then.
   bool sort();
   // Gives back the memory and what it takes in the store, and needs none. No loop goes on over the list.
   void clear();

@@ -29,7 +29,13 @@ void TarnReportingSessionMessageLog::note(Newest& newest, std::size_t index,
 }
 
 void TarnReportingSessionMessageLog::sort() {
-  if (!messages_.sort()) return;
+  try {
+    if (!messages_.sort()) return;
+  } catch (...) {  // for want of memory; records that are pointed to may be gone
+    newest_.clear();
+    kept_ = 0;
+    throw;
+  }
   forgetKept();
   for (auto& [kind, newest] : newest_) {
     newest = {};

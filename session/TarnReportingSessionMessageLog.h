@@ -32,7 +32,8 @@ class TarnReportingSessionMessageLog {
   // The record is the newest of its category and type from now on. Without the memory for it nothing has changed.
   void append(Record record);
   // Sorts by time stamp (TarnReportingSessionMessage::sortMessages). Without a pass over the look-up when nothing
-  // moved.
+  // moved. When memory is missing for it, nothing counts as the newest of a kind any more, and of a log with pages
+  // those are gone that weren't merged yet.
   void sort();
   // The log is as new.
   void clear();

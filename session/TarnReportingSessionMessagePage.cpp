@@ -93,21 +93,23 @@ std::size_t TarnReportingSessionMessagePage::Maker::numberOf(
 Result<std::shared_ptr<const TarnReportingSessionMessagePage>> TarnReportingSessionMessagePage::Maker::finish(
     platform::OverflowStore& store, const std::shared_ptr<Counts>& counts) {
   writer_.writeNumber(checksum(image_));
+  const auto page = makePage(counts);  // first, so that what lies in the store has somebody who removes it
   Result<platform::OverflowStore::Place> written = store.write(image_);
   if (written.failed()) return {nullptr, std::move(written.error)};
-  const std::size_t bytes = image_.size();
-  std::string().swap(image_);  // an assignment would keep the room, and the page with it
-  const auto page = makePage(counts);
   page->store_ = &store;
   page->place_ = written.value;
-  page->storedBytes_ = bytes;
-  counts->bytesInStore += bytes;
+  page->storedBytes_ = image_.size();
+  counts->bytesInStore += page->storedBytes_;
+  std::string().swap(image_);  // an assignment would keep the room, and the page with it
+  fill(*page);
   return {page, {}};
 }
 
 std::shared_ptr<const TarnReportingSessionMessagePage> TarnReportingSessionMessagePage::Maker::finishInMemory(
     const std::shared_ptr<Counts>& counts) {
-  return makePage(counts);
+  const auto page = makePage(counts);
+  fill(*page);
+  return page;
 }
 
 std::shared_ptr<TarnReportingSessionMessagePage> TarnReportingSessionMessagePage::Maker::makePage(
@@ -117,11 +119,14 @@ std::shared_ptr<TarnReportingSessionMessagePage> TarnReportingSessionMessagePage
   };
   const std::shared_ptr<TarnReportingSessionMessagePage> page = std::make_shared<Constructible>();
   page->counts_ = counts;
-  page->image_ = std::move(image_);
-  counts->bytesInMemory += page->image_.size();
-  page->destinations_ = std::move(destinations_);
-  page->contents_ = std::move(contents_);
   return page;
+}
+
+void TarnReportingSessionMessagePage::Maker::fill(TarnReportingSessionMessagePage& page) noexcept {
+  page.image_ = std::move(image_);
+  page.counts_->bytesInMemory += page.image_.size();
+  page.destinations_ = std::move(destinations_);
+  page.contents_ = std::move(contents_);
 }
 
 TarnReportingSessionMessagePage::~TarnReportingSessionMessagePage() {

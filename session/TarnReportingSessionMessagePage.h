@@ -70,8 +70,10 @@ class TarnReportingSessionMessagePage {
     std::shared_ptr<const TarnReportingSessionMessagePage> finishInMemory(const std::shared_ptr<Counts>& counts);
 
    private:
-    // The page with what was added so far; the maker is spent.
-    std::shared_ptr<TarnReportingSessionMessagePage> makePage(const std::shared_ptr<Counts>& counts);
+    // A page without records.
+    static std::shared_ptr<TarnReportingSessionMessagePage> makePage(const std::shared_ptr<Counts>& counts);
+    // Gives it what was added so far; the maker is spent.
+    void fill(TarnReportingSessionMessagePage& page) noexcept;
     // The place of these destinations in the page's table plus one; 0 for everyone.
     std::size_t numberOf(const TarnReportingSessionMessage::DestinationWorkers& destinations);
     void noteKind(TarnReportingSessionMessage::Kind kind);

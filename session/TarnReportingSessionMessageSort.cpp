@@ -105,12 +105,12 @@ void TarnReportingSessionMessageList::sortPages() {
   Pages all = pages();
   TarnReportingSessionMessages recent;
   if (recent_) {
+    TarnReportingSessionMessage::sortMessages(*recent_);
     recent.swap(*recent_);
   }
   const bool wasTold = isTold_;
   clear();
   isTold_ = wasTold;
-  TarnReportingSessionMessage::sortMessages(recent);
   double latest = 0;
   for (const auto& page : all) {
     latest = page == all.front() ? page->contents().latest : std::max(latest, page->contents().latest);

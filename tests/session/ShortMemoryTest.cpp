@@ -22,9 +22,10 @@ class LogShortMemory : public ::testing::Test {
   using List = TarnReportingSessionMessageList;
   using Record = List::Record;
 
-  static Record made(int number) {
-    return std::make_shared<TarnReportingSessionMessage>(plist::Dictionary{{"number", number}},
-                                                         AudioEventCategory::Playback, AudioEventType::State);
+  static Record made(int number, double time = 0) {
+    return std::make_shared<TarnReportingSessionMessage>(
+        plist::Dictionary{{"number", number}, {"tarnreporting_timestamp", time}}, AudioEventCategory::Playback,
+        AudioEventType::State);
   }
   static std::size_t bytes() { return ProcessState::of<TarnReportingSessionLogMemory>()->usage().bytes; }
   // Calls append(record) with that allocation failing; whether one did.
@@ -33,6 +34,18 @@ class LogShortMemory : public ::testing::Test {
     const FailingAllocations failing(ordinal);
     try {
       append(record);
+    } catch (const std::bad_alloc&) {
+      threw = true;
+    }
+    return failing.happened();
+  }
+
+  // Sorts the list or log with that allocation failing; whether one did.
+  template <class Sorted>
+  static bool sortWithout(std::uint64_t ordinal, Sorted& sorted, bool& threw) {
+    const FailingAllocations failing(ordinal);
+    try {
+      sorted.sort();
     } catch (const std::bad_alloc&) {
       threw = true;
     }
@@ -79,6 +92,65 @@ TEST_F(LogShortMemory, TheNewestOfAKindIsNoneThatFoundNoRoom) {
     ASSERT_EQ(log.newest(category, AudioEventType::State) == nullptr, threw) << ordinal;
   }
   EXPECT_GT(log.messages().overflowed(), 0U);
+}
+
+TEST_F(LogShortMemory, ASortThatFailsLosesNothing) {
+  constexpr int kRecords = 100;
+  bool happened = true;
+  for (std::uint64_t ordinal = 1; happened; ++ordinal) {
+    List list(7);
+    for (int number = 0; number < kRecords; ++number) {
+      list.append(made(number, kRecords - number));
+    }
+    bool threw = false;
+    happened = sortWithout(ordinal, list, threw);
+    ASSERT_EQ(list.size(), static_cast<std::size_t>(kRecords));
+    for (int index = 0; index < kRecords; ++index) {
+      const int number = threw ? index : kRecords - 1 - index;
+      ASSERT_NE(list[static_cast<std::size_t>(index)], nullptr) << ordinal;
+      ASSERT_EQ(list[static_cast<std::size_t>(index)]->message()["number"].asInt64(), number) << ordinal;
+    }
+  }
+}
+
+TEST_F(LogShortMemory, ASortThatFailsLeavesNoNewestOfAKind) {
+  platform_.overflow.setBounds(8, std::size_t{1} << 30U);  // each record is a page
+  bool happened = true;
+  int failed = 0;
+  for (std::uint64_t ordinal = 1; happened; ++ordinal) {
+    TarnReportingSessionMessageLog log(7);
+    for (const int time : {3, 1, 2}) {
+      log.append(made(time, time));
+    }
+    bool threw = false;
+    happened = sortWithout(ordinal, log, threw);
+    failed += threw ? 1 : 0;
+    ASSERT_EQ(log.newest(AudioEventCategory::Playback, AudioEventType::State) == nullptr, threw) << ordinal;
+  }
+  EXPECT_GT(failed, 0);
+}
+
+TEST_F(LogShortMemory, NothingStaysInTheStoreOfAPageThatCouldNotBeMade) {
+  const auto counts = std::make_shared<List::Page::Counts>();
+  const Record record = made(1);
+  bool happened = true;
+  int failed = 0;
+  for (std::uint64_t ordinal = 1; happened; ++ordinal) {
+    List::Page::Maker maker(0);
+    maker.add(*record);
+    std::shared_ptr<const List::Page> page;
+    {
+      const FailingAllocations failing(ordinal);
+      try {
+        page = maker.finish(platform_.overflow, counts).value;
+      } catch (const std::bad_alloc&) {
+        ++failed;
+      }
+      happened = failing.happened();
+    }
+    ASSERT_EQ(platform_.overflow.blocks(), page != nullptr ? 1U : 0U) << ordinal;
+  }
+  EXPECT_GT(failed, 0);
 }
 
 TEST_F(LogShortMemory, TheEndOfAListNeedsNone) {
