@@ -103,24 +103,42 @@ OverflowFile::Run OverflowFile::runAt(const Slots& slots, std::size_t index) noe
 }
 
 Result<platform::OverflowStore::Place> OverflowFile::write(std::string_view bytes) {
-  Block block{{}, bytes.size()};
-  int descriptor = -1;
-  if (Status taken = take((bytes.size() + kSlotBytes - 1) / kSlotBytes, block.slots, descriptor); taken.failed()) {
-    return {0, std::move(taken)};
+  Place place = 0;
+  Slots* slots = nullptr;
+  {
+    const MutexLock guard(mutex_);
+    place = ++last_;
+    slots = &blocks_.emplace(place, Block{{}, bytes.size()}).first->second.slots;
   }
-  for (std::size_t index = 0; index < block.slots.size();) {
-    const Run run = runAt(block.slots, index);
+  Status filled;
+  try {
+    filled = fill(*slots, bytes);
+  } catch (...) {
+    remove(place);
+    throw;
+  }
+  if (filled.failed()) {
+    remove(place);
+    return {0, std::move(filled)};
+  }
+  return {place, {}};
+}
+
+Status OverflowFile::fill(Slots& slots, std::string_view bytes) {
+  int descriptor = -1;
+  if (Status taken = take((bytes.size() + kSlotBytes - 1) / kSlotBytes, slots, descriptor); taken.failed()) {
+    return taken;
+  }
+  for (std::size_t index = 0; index < slots.size();) {
+    const Run run = runAt(slots, index);
     if (Status written =
             writeAt(descriptor, bytes.substr(index * kSlotBytes, run.count * kSlotBytes), offsetOf(run.first));
         written.failed()) {
-      giveBack(block.slots);
-      return {0, std::move(written)};
+      return written;
     }
     index += run.count;
   }
-  const MutexLock guard(mutex_);
-  blocks_.emplace(++last_, std::move(block));
-  return {last_, {}};
+  return {};
 }
 
 Result<std::string> OverflowFile::read(Place place) {

@@ -51,6 +51,8 @@ class OverflowFile final : public platform::OverflowStore {
   };
 
   Status open() TARN_REQUIRES(mutex_);
+  // Takes slots for the bytes and writes them there. What was taken is in `slots`, also when that fails.
+  Status fill(Slots& slots, std::string_view bytes);
   Status take(std::size_t count, Slots& slots, int& descriptor);
   void giveBack(const Slots& slots) noexcept;
   static Run runAt(const Slots& slots, std::size_t index) noexcept;

@@ -4,6 +4,7 @@
 #include <sys/socket.h>
 
 #include <atomic>
+#include <cstdint>
 #include <memory>
 #include <new>
 #include <string>
@@ -11,9 +12,11 @@
 #include "host/loop/LinuxWorkQueues.h"
 #include "host/loop/MainLoop.h"
 #include "host/loop/ServerQueue.h"
+#include "host/machine/OverflowFile.h"
 #include "host/system/MemoryReserve.h"
 #include "testing/ManualClock.h"
 #include "tests/host/Eventually.h"
+#include "tests/host/TemporaryFolder.h"
 #include "tests/host/loop/RunningLoop.h"
 #include "tests/support/FailingAllocations.h"
 
@@ -95,6 +98,18 @@ TEST(WorkQueuesShortMemory, WhatThereIsNoneForIsNotHandedOverAndWhatComesAfterIt
   }
   EXPECT_TRUE(eventually([&] { return ran == 100; }));
   EXPECT_TRUE(queues.settle(10s));
+}
+
+TEST(OverflowFileShortMemory, WhatCouldNotBeKeptTakesNoRoom) {
+  constexpr std::size_t kBytes = 3 * OverflowFile::kSlotBytes;
+  const TemporaryFolder folder;
+  OverflowFile file(folder.path(), {}, std::size_t{1} << 20U);
+  const std::string block(kBytes, 'x');
+  Result<OverflowFile::Place> kept;
+  const int failed = failEachAllocation([&] { kept = file.write(block); }, [&] { EXPECT_EQ(file.size()->load(), 0); });
+  EXPECT_GT(failed, 0);
+  EXPECT_EQ(file.size()->load(), static_cast<std::int64_t>(kBytes));
+  EXPECT_EQ(file.read(kept.value).value, block);
 }
 
 class MemoryReserveShortMemory : public ::testing::Test {
