@@ -87,8 +87,8 @@ class TarnReportingSessionMessageList {
       noteChange(index);
     }
   }
-  // Calls take(index, record) from the last record to the first until it returns false. Pages of which wants(kind) is
-  // true for none of the kinds are passed over.
+  // Calls take(index, record) from the last record to the first. Pages of which wants(kind) is true for none of the
+  // kinds are passed over.
   template <class Wants, class Take>
   void goBack(const Wants& wants, Take take) const;
   // How often records of pages were changed in place. Who keeps a record that was read back looks here whether it may
@@ -223,13 +223,13 @@ class TarnReportingSessionMessageList::Iterator {
 template <class Wants, class Take>
 void TarnReportingSessionMessageList::goBack(const Wants& wants, Take take) const {
   for (std::size_t index = size(); index > overflowed_; --index) {
-    if (!take(index - 1, (*recent_)[index - 1 - overflowed_])) return;
+    take(index - 1, (*recent_)[index - 1 - overflowed_]);
   }
   for (std::size_t part = parts_.size(); part > 0; --part) {
     if (!parts_[part - 1].page->contents().mayHave(wants)) continue;
     const Opened& opened = open(part - 1);
     for (std::size_t index = opened.records.size(); index > 0; --index) {
-      if (!take(opened.first + index - 1, opened.records[index - 1])) return;
+      take(opened.first + index - 1, opened.records[index - 1]);
     }
   }
 }

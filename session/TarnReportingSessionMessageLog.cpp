@@ -40,16 +40,13 @@ void TarnReportingSessionMessageLog::sort() {
   for (auto& [kind, newest] : newest_) {
     newest = {};
   }
-  std::size_t left = newest_.size();
+  // What is still missing at the end lay in pages that are lost.
   const auto isMissing = [&](TarnReportingSessionMessage::Kind kind) { return newest_[kind].index == kNone; };
   messages_.goBack(isMissing, [&](std::size_t index, const Record& record) {
     if (isMissing(record->kind())) {
       newest_[record->kind()] = {index, record.get(), nullptr};
-      --left;
     }
-    return left > 0;
   });
-  std::erase_if(newest_, [](const auto& entry) { return entry.second.index == kNone; });  // of pages that are lost
 }
 
 void TarnReportingSessionMessageLog::clear() {

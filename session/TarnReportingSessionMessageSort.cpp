@@ -1,13 +1,14 @@
 // How TarnReportingSessionMessageList sorts what doesn't fit into memory.
 //
-// Clients nearly always send in time order, so what is in order is left alone. Pages in a row that are in order are one
-// run, and the runs are merged. A page that nothing else falls into goes over as it is, without being read; one that
-// overlaps with others is read when its time comes. So a marker of the stop that is older than all messages costs one
-// page, messages of two threads that are a little out of order cost one pass over them, and only what lies in no order
-// at all is sorted in runs first.
+// Clients nearly always send in time order, so what is in order is left alone. Pages in a row whose times don't overlap
+// are one run, and the runs are merged. A page that nothing else falls into goes over as it is, without being read; one
+// that overlaps with others is read when its time comes. So a marker of the stop that is older than all messages costs
+// one page, messages of two threads that are a little out of order cost one pass over them, and only what lies in no
+// order at all is sorted in runs first.
 #include <algorithm>
 #include <functional>
 #include <iterator>
+#include <limits>
 #include <queue>
 #include <utility>
 #include <vector>
@@ -24,8 +25,7 @@ constexpr std::size_t kMostOpen = 64;
 using Pages = std::vector<std::shared_ptr<const TarnReportingSessionMessagePage>>;
 
 bool follows(const TarnReportingSessionMessagePage& page, const TarnReportingSessionMessagePage& earlier) {
-  return page.contents().isSorted && earlier.contents().isSorted &&
-         earlier.contents().latest <= page.contents().earliest;
+  return earlier.contents().latest <= page.contents().earliest;
 }
 
 // How many pages there are at the most that have messages before and after the same moment.
@@ -47,8 +47,8 @@ std::size_t mostOverlapping(const Pages& pages) {
 
 }  // namespace
 
-// Records in order: those of the page that was read, those of further pages, then the rest. A page that is alone in its
-// run is put in order when it is read.
+// Records in order: those of the page that was read, those of further pages, then the rest. A page is put in order when
+// it is read.
 struct TarnReportingSessionMessageList::Run {
   TarnReportingSessionMessages open;
   Pages pages;
@@ -111,9 +111,9 @@ void TarnReportingSessionMessageList::sortPages() {
   const bool wasTold = isTold_;
   clear();
   isTold_ = wasTold;
-  double latest = 0;
+  double latest = -std::numeric_limits<double>::infinity();
   for (const auto& page : all) {
-    latest = page == all.front() ? page->contents().latest : std::max(latest, page->contents().latest);
+    latest = std::max(latest, page->contents().latest);
   }
   const auto after =
       std::find_if(recent.begin(), recent.end(), [&](const Record& record) { return record->sortingTime() >= latest; });

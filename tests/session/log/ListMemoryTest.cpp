@@ -196,6 +196,28 @@ TEST_F(ListMemory, MovedListKeepsItsReporterItsAccountAndItsChunks) {
   EXPECT_NE(platform_.log.messages()[0].find("reporterID=4711 messages=17 "), std::string::npos);
 }
 
+TEST_F(ListMemory, MovedListKnowsWhichChunksAreLeft) {
+  setBounds(16 * kKilobyte, kNoBound);
+  List list;
+  for (int n = 0; n < 40; ++n) {
+    list.append(sized(kKilobyte / 2, n, n));  // chunks of four
+  }
+  fill(list, 6, 40);  // and of two
+  ASSERT_GT(list.overflowed(), 0U);
+  List moved(std::move(list));
+  for (int n = 46; n < 100; ++n) {
+    moved.append(kilobyte(n, n));
+    const auto& recent = moved.recent();
+    const std::size_t halves = static_cast<std::size_t>(
+        std::count_if(recent.begin(), recent.end(), [](const Record& record) { return numberOf(record) < 40; }));
+    ASSERT_EQ(usage().bytes, (recent.size() - halves) * kKilobyte + halves * kKilobyte / 2) << n;
+  }
+  EXPECT_EQ(numbers(moved), upTo(100));
+  fill(list, 40);
+  EXPECT_EQ(numbers(list), upTo(40));
+  EXPECT_EQ(list.recent().size(), 16U);
+}
+
 TEST_F(ListMemory, ListThatWasMovedFromIsAsNew) {
   setBounds(16 * kKilobyte, kNoBound);
   List list(4711);

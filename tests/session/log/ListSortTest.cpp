@@ -122,5 +122,106 @@ TEST_F(ListSort, PageThatIsLostIsGoneAfterwards) {
   EXPECT_EQ(usage().lost, 1U);
 }
 
+TEST_F(ListSort, EmptyListHasNothingToMove) {
+  List list;
+  EXPECT_FALSE(list.sort());
+}
+
+// Pages of two messages that all overlap: each has one of the first half of the time and one of the second.
+class OverlappingPages : public KilobyteLists {
+ protected:
+  OverlappingPages() { setBounds(16 * kKilobyte, kNoBound); }
+  // So many of them, after so many that overlap with none, and then as many as the memory holds, which are the latest.
+  void fillPages(List& list, int overlapping, int apart = 0) {
+    int n = 0;
+    for (int page = 0; page < apart; ++page) {
+      list.append(kilobyte(n++, -1000 + 2 * page));
+      list.append(kilobyte(n++, -999 + 2 * page));
+    }
+    for (int page = 0; page < overlapping; ++page) {
+      list.append(kilobyte(n++, page));
+      list.append(kilobyte(n++, 1000 + page));
+    }
+    for (int rest = 0; rest < 16; ++rest) {
+      list.append(kilobyte(n++, 5000 + rest));
+    }
+    ASSERT_EQ(list.overflowed(), static_cast<std::size_t>(2 * (apart + overlapping)));
+  }
+  std::size_t readsOfSort(List& list) {
+    const std::size_t before = platform_.overflow.blocksRead();
+    EXPECT_TRUE(list.sort());
+    return platform_.overflow.blocksRead() - before;
+  }
+};
+
+TEST_F(OverlappingPages, SixtyFourAreMergedByReadingEachOnce) {
+  List list;
+  fillPages(list, 64);
+  EXPECT_EQ(readsOfSort(list), 64U);
+}
+
+TEST_F(OverlappingPages, MoreAreSortedInRunsFirst) {
+  List list;
+  fillPages(list, 65);
+  EXPECT_GT(readsOfSort(list), 65U);
+}
+
+TEST_F(OverlappingPages, AreCountedAlsoAfterPagesThatOverlapWithNone) {
+  List list;
+  fillPages(list, 65, 10);
+  EXPECT_GT(readsOfSort(list), 75U);  // in runs each is read, else those that overlap
+}
+
+TEST_F(OverlappingPages, WhatLayOnDiskLiesThereAfterwardsInWholePages) {
+  List list;
+  fillPages(list, 100);
+  EXPECT_TRUE(list.sort());
+  EXPECT_EQ(list.overflowed(), 200U);
+  EXPECT_EQ(platform_.overflow.blocks(), 100U);
+  EXPECT_LE(usage().bytes, 16 * kKilobyte);
+}
+
+TEST_F(OverlappingPages, RunsThatFollowEachOtherAreNotReadAgain) {
+  List list;
+  fillPages(list, 100);
+  const std::size_t before = store_.places().size();
+  EXPECT_TRUE(list.sort());
+  EXPECT_EQ(store_.places().size() - before, 100U);
+}
+
+TEST_F(OverlappingPages, RunsThatFindNoMoreRoomLoseNothing) {
+  List list;
+  fillPages(list, 100);
+  std::vector<std::int64_t> before = numbers(list);
+  const std::size_t written = store_.places().size();
+  store_.setWatch([&](WatchedStore::Call) { platform_.overflow.setFull(store_.places().size() >= written + 30); });
+  EXPECT_TRUE(list.sort());
+  store_.setWatch(nullptr);
+  std::vector<double> times;
+  for (const Record& record : list) {
+    times.push_back(record->sortingTime());
+  }
+  EXPECT_TRUE(std::is_sorted(times.begin(), times.end()));
+  std::vector<std::int64_t> after = numbers(list);
+  std::sort(after.begin(), after.end());
+  EXPECT_EQ(after, before);
+  EXPECT_EQ(usage().lost, 0U);
+}
+
+TEST_F(OverlappingPages, AreGoneThroughBackwardsWithTheirPlaces) {
+  List list;
+  fillPages(list, 3);
+  std::vector<std::size_t> places;
+  std::vector<std::int64_t> found;
+  list.goBack([](TarnReportingSessionMessage::Kind) { return true; },
+              [&](std::size_t place, const Record& record) {
+                places.push_back(place);
+                found.push_back(numberOf(record));
+              });
+  EXPECT_EQ(found, downFrom(22));
+  EXPECT_TRUE(std::equal(places.begin(), places.end(), found.begin(), found.end(),
+                         [](std::size_t place, std::int64_t n) { return static_cast<std::int64_t>(place) == n; }));
+}
+
 }  // namespace
 }  // namespace tarn
