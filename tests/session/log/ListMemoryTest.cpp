@@ -31,6 +31,13 @@ TEST_F(ListMemory, BoundOfASessionHoldsToTheByte) {
   EXPECT_EQ(usage().bytes, 15 * kKilobyte);
 }
 
+TEST_F(ListMemory, PageTakesTheMessagesThatFillAnEighthOfTheBound) {
+  setBounds(18 * kKilobyte, kNoBound);
+  List list;
+  fill(list, 19);
+  EXPECT_EQ(list.overflowed(), 3U);
+}
+
 TEST_F(ListMemory, BoundOfAllHoldsToTheByte) {
   setBounds(64 * kKilobyte, 16 * kKilobyte);
   List one;
