@@ -48,6 +48,11 @@ def export(build):
     return json.loads(text)["data"][0]["files"]
 
 
+def in_tree(name):
+    """A file's name from the root of the tree. The build maps names to "./": what stands before it is where it ran."""
+    return os.path.relpath(os.path.join(ROOT, name.rpartition("/./")[2]), ROOT)
+
+
 def percent(count, covered):
     return 100.0 * covered / count if count else 100.0
 
@@ -57,7 +62,7 @@ def main():
     arguments.add_argument("build", metavar="BUILD")
     rows = []
     for file in export(arguments.parse_args().build):
-        path = os.path.relpath(file["filename"], ROOT)
+        path = in_tree(file["filename"])
         if belongs(path):
             counts = {kind: (file["summary"][kind]["count"], file["summary"][kind]["covered"]) for kind in BARS}
             rows.append((sum(count - covered for count, covered in counts.values()), path, counts))

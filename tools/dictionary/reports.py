@@ -27,7 +27,6 @@ C_TOP = f"""\
  * {NOTE} */
 #pragma once
 
-#include <string.h>
 #include <tarnreporting.h>
 
 #ifdef __cplusplus
@@ -41,8 +40,11 @@ C_HELPERS = """
 /* A text that ends at its zero, as a value; null counts as empty. Longer than a message may hold it is refused when it
  * is posted. */
 static inline tarnreporting_value tarnreporting_report_text(const char* text) {
-  const size_t length = text != NULL ? strlen(text) : 0;
-  return tarnreporting_text(text, length < UINT32_MAX ? (uint32_t)length : UINT32_MAX);
+  uint32_t length = 0;
+  while (text != NULL && length < UINT32_MAX && text[length] != 0) {
+    ++length;
+  }
+  return tarnreporting_text(text, length);
 }
 
 /* Of a rate in Hz, as messages have it: 48000.0. Writes up to 12 bytes to `room`, which must stay until the value is
@@ -55,7 +57,7 @@ static inline tarnreporting_value tarnreporting_report_hertz(uint32_t rate, char
     ++digits;
   }
   for (at = digits; at > 0; --at) {
-    room[at - 1] = (char)('0' + rate % 10);
+    room[at - 1] = "0123456789"[rate % 10];
     rate /= 10;
   }
   room[digits] = '.';

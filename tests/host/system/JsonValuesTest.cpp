@@ -159,17 +159,19 @@ TEST(JsonValues, WhatWouldNotReadBackEqualIsNotWritten) {
   EXPECT_FALSE(jsonText("\xff"));
   EXPECT_FALSE(jsonText(plist::Dictionary{{"$date", 5}}));
   EXPECT_FALSE(jsonText(plist::Dictionary{{"inner", plist::Dictionary{{"$data", "eA=="}}}}));
-  plist::Array deep;
-  for (int level = 1; level < 65; ++level) {
-    deep = plist::Array{deep};
-  }
-  EXPECT_FALSE(jsonText(deep));
-  plist::Array atLimit{plist::Date{1}};
-  for (int level = 1; level < 63; ++level) {
-    atLimit = plist::Array{atLimit};
-  }
+  // Braces around an array alone would be a copy of it to some compilers.
+  const auto nested = [](plist::Array inner, int levels) {
+    for (int level = 0; level < levels; ++level) {
+      plist::Array outer;
+      outer.append(inner);
+      inner = outer;
+    }
+    return inner;
+  };
+  EXPECT_FALSE(jsonText(nested({}, 64)));
+  const plist::Array atLimit = nested(plist::Array{plist::Date{1}}, 62);
   EXPECT_TRUE(jsonText(atLimit));
-  EXPECT_FALSE(jsonText(plist::Array{atLimit}));  // the form of the date is a level of its own
+  EXPECT_FALSE(jsonText(nested(atLimit, 1)));  // the form of the date is a level of its own
 }
 
 }  // namespace

@@ -93,43 +93,42 @@ TEST_F(CheckpointerTest, GoesOnAfterAnotherOpening) {
   EXPECT_EQ(inDatabase(), "3");
 }
 
-using RecorderCheckpoint = RecorderFixture;
+class RecorderCheckpoint : public RecorderFixture {
+ protected:
+  // 46 events are committed, and a checkpoint has got as far as the synchronisation of the database.
+  void stallInACheckpoint() {
+    gatherForLong();
+    options_.maxMegabytes = 2;
+    start();
+    record("makes the tables");
+    stop();
+    start().waitUntilOpened();
+    files_.stall(FaultyFiles::Call::SyncOfDatabase);
+    recordMany(45, 1000);
+    ASSERT_TRUE(flush());
+    ASSERT_TRUE(eventually([&] { return files_.isStalled(); }));
+  }
+
+  FaultyFiles files_;
+};
 
 TEST_F(RecorderCheckpoint, DoesNotHoldUpCommits) {
-  FaultyFiles files;
-  gatherForLong();
-  options_.maxMegabytes = 2;
-  start();
-  record("makes the tables");
-  stop();
-  start().waitUntilOpened();
-  files.stall(FaultyFiles::Call::SyncOfDatabase);
-  recordMany(45, 1000);
-  ASSERT_TRUE(flush());
-  ASSERT_TRUE(eventually([&] { return files.isStalled(); }));
+  stallInACheckpoint();
+  ASSERT_TRUE(files_.isStalled());
   record("next");
   EXPECT_TRUE(flush());
-  EXPECT_TRUE(files.isStalled());
-  files.letGo();
+  EXPECT_TRUE(files_.isStalled());
+  files_.letGo();
   stop();
   EXPECT_EQ(errors(), 0U);
   EXPECT_EQ(askOne(file(), "SELECT count(*) FROM events"), "47");
 }
 
 TEST_F(RecorderCheckpoint, ThatFailsWhileNothingComesIsMetAgainAndOver) {
-  FaultyFiles files;
-  gatherForLong();
-  options_.maxMegabytes = 2;
-  start();
-  record("makes the tables");
-  stop();
-  start().waitUntilOpened();
-  files.stall(FaultyFiles::Call::SyncOfDatabase);
-  recordMany(45, 1000);
-  ASSERT_TRUE(flush());
-  ASSERT_TRUE(eventually([&] { return files.isStalled(); }));
-  files.fail(FaultyFiles::Call::Sync, 1, FaultyFiles::Fault::InputOutput, 2);
-  files.letGo();
+  stallInACheckpoint();
+  ASSERT_TRUE(files_.isStalled());
+  files_.fail(FaultyFiles::Call::Sync, 1, FaultyFiles::Fault::InputOutput, 2);
+  files_.letGo();
   EXPECT_TRUE(eventually([&] { return log_.count("recorder writes to ") == 1; }));
   EXPECT_EQ(errors(), 1U);
   stop();

@@ -31,6 +31,13 @@ TEST_F(ListMemory, BoundOfASessionHoldsToTheByte) {
   EXPECT_EQ(usage().bytes, 15 * kKilobyte);
 }
 
+TEST_F(ListMemory, PageTakesTheMessagesThatFillAnEighthOfTheBound) {
+  setBounds(18 * kKilobyte, kNoBound);
+  List list;
+  fill(list, 19);
+  EXPECT_EQ(list.overflowed(), 3U);
+}
+
 TEST_F(ListMemory, BoundOfAllHoldsToTheByte) {
   setBounds(64 * kKilobyte, 16 * kKilobyte);
   List one;
@@ -198,24 +205,42 @@ TEST_F(ListMemory, MovedListKeepsItsReporterItsAccountAndItsChunks) {
 
 TEST_F(ListMemory, MovedListKnowsWhichChunksAreLeft) {
   setBounds(16 * kKilobyte, kNoBound);
+  const auto append = [](List& to, int n) {  // chunks of four, then of two
+    to.append(n < 40 ? sized(kKilobyte / 2, n, n) : kilobyte(n, n));
+  };
+  const auto bytesOf = [](const List& of) {
+    const auto& recent = of.recent();
+    const auto halves =
+        std::count_if(recent.begin(), recent.end(), [](const Record& record) { return numberOf(record) < 40; });
+    return recent.size() * kKilobyte - static_cast<std::size_t>(halves) * kKilobyte / 2;
+  };
   List list;
-  for (int n = 0; n < 40; ++n) {
-    list.append(sized(kKilobyte / 2, n, n));  // chunks of four
+  for (int n = 0; n < 46; ++n) {
+    append(list, n);
   }
-  fill(list, 6, 40);  // and of two
   ASSERT_GT(list.overflowed(), 0U);
   List moved(std::move(list));
   for (int n = 46; n < 100; ++n) {
-    moved.append(kilobyte(n, n));
-    const auto& recent = moved.recent();
-    const std::size_t halves = static_cast<std::size_t>(
-        std::count_if(recent.begin(), recent.end(), [](const Record& record) { return numberOf(record) < 40; }));
-    ASSERT_EQ(usage().bytes, (recent.size() - halves) * kKilobyte + halves * kKilobyte / 2) << n;
+    append(moved, n);
+    ASSERT_EQ(usage().bytes, bytesOf(moved)) << n;
   }
   EXPECT_EQ(numbers(moved), upTo(100));
-  fill(list, 40);
-  EXPECT_EQ(numbers(list), upTo(40));
-  EXPECT_EQ(list.recent().size(), 16U);
+  for (int n = 36; n < 100; ++n) {
+    append(list, n);
+    ASSERT_EQ(usage().bytes, bytesOf(moved) + bytesOf(list)) << n;
+  }
+}
+
+TEST_F(ListMemory, EachKeyOfANewShapeCostsItsTextAndItsPlaceInTheTable) {
+  const auto cost = [] {
+    const std::size_t before = usage().bytes;
+    List list;
+    list.append(std::make_shared<TarnReportingSessionMessage>(plist::Dictionary{{"first key", 1}, {"second", 2}},
+                                                              AudioEventCategory::Playback, AudioEventType::State));
+    return usage().bytes - before;
+  };
+  const std::size_t ofTheFirst = cost();
+  EXPECT_EQ(ofTheFirst - cost(), 2 * 56 + std::string_view("first keysecond").size());
 }
 
 TEST_F(ListMemory, ListThatWasMovedFromIsAsNew) {

@@ -181,6 +181,20 @@ TEST_F(OverlappingPages, WhatLayOnDiskLiesThereAfterwardsInWholePages) {
   EXPECT_LE(usage().bytes, 16 * kKilobyte);
 }
 
+TEST_F(OverlappingPages, WhatIsMergedGoesBackToDiskAsSoonAsAPageIsFull) {
+  List list;
+  fillPages(list, 64);
+  std::size_t mostBytes = 0;
+  store_.setWatch([&](WatchedStore::Call call) {
+    mostBytes = call == WatchedStore::Call::Write ? std::max(mostBytes, usage().bytes) : mostBytes;
+  });
+  EXPECT_TRUE(list.sort());
+  store_.setWatch(nullptr);
+  EXPECT_EQ(mostBytes, 2 * kKilobyte);
+  EXPECT_EQ(platform_.overflow.blocks(), 64U);
+  EXPECT_EQ(list.overflowed(), 128U);
+}
+
 TEST_F(OverlappingPages, RunsThatFollowEachOtherAreNotReadAgain) {
   List list;
   fillPages(list, 100);
