@@ -31,6 +31,9 @@ Error statusError(int error) {
 
 }  // namespace
 
+StoreFiles::StoreFiles(std::filesystem::path path, const platform::Clock& clock)
+    : path_(std::move(path)), log_(path_.string() + kLog), index_(path_.string() + kIndex), clock_(clock) {}
+
 Status StoreFiles::prepare() {
   if (auto error = putOddCompanionsAside(); error.failed()) return error;
   struct stat status {};
@@ -46,8 +49,7 @@ Status StoreFiles::prepare() {
 
 // A directory, a pipe or a link in the place of the log or its index is none of ours, and no link is followed.
 Status StoreFiles::putOddCompanionsAside() {
-  for (const char* const suffix : {kLog, kIndex}) {
-    const std::filesystem::path name = companion(suffix);
+  for (const auto& [name, suffix] : {std::pair(log_, kLog), std::pair(index_, kIndex)}) {
     struct stat status {};
     if (::lstat(name.c_str(), &status) != 0 || S_ISREG(status.st_mode)) continue;
     const std::filesystem::path aside = freeName(suffix);
@@ -92,7 +94,7 @@ Status StoreFiles::checkIsOpened() const {
 
 Result<StoreFiles::LogState> StoreFiles::lookAtLog(std::int64_t bytes) {
   struct stat status {};
-  const bool isThere = ::stat(companion(kLog).c_str(), &status) == 0;
+  const bool isThere = ::stat(log_.c_str(), &status) == 0;
   if (!isThere && errno != ENOENT) return {{}, statusError(errno)};
   if (isThere && logInode_ == 0) {
     logInode_ = status.st_ino;
@@ -103,7 +105,7 @@ Result<StoreFiles::LogState> StoreFiles::lookAtLog(std::int64_t bytes) {
 
 std::int64_t StoreFiles::indexBytes() const noexcept {
   struct stat status {};
-  return ::stat(companion(kIndex).c_str(), &status) == 0 ? std::int64_t{status.st_size} : 0;
+  return ::stat(index_.c_str(), &status) == 0 ? std::int64_t{status.st_size} : 0;
 }
 
 Status StoreFiles::checkIndex() const {
@@ -128,10 +130,10 @@ Result<std::filesystem::path> StoreFiles::setAside() const {
   std::filesystem::rename(path_, aside, failure);
   if (failure) return {{}, Error{failure.value(), "it can't be set aside: " + failure.message()}};
   // The log and its index go along: what they hold belongs to the old file, and a fresh one must not find them.
-  for (const char* const suffix : {kLog, kIndex}) {
-    std::filesystem::rename(companion(suffix), aside.string() + suffix, failure);
+  for (const auto& [name, suffix] : {std::pair(log_, kLog), std::pair(index_, kIndex)}) {
+    std::filesystem::rename(name, aside.string() + suffix, failure);
     if (failure && failure != std::errc::no_such_file_or_directory) {
-      std::filesystem::remove(companion(suffix), failure);
+      std::filesystem::remove(name, failure);
     }
   }
   return {aside};

@@ -20,7 +20,7 @@ class StoreFiles {
  public:
   enum class LogState { Whole, Gone, Cut };
 
-  StoreFiles(std::filesystem::path path, const platform::Clock& clock) : path_(std::move(path)), clock_(clock) {}
+  StoreFiles(std::filesystem::path path, const platform::Clock& clock);
 
   const std::filesystem::path& path() const noexcept { return path_; }
 
@@ -58,10 +58,12 @@ class StoreFiles {
   [[nodiscard]] Result<Identity> readIdentity() const;
   [[nodiscard]] Status putOddCompanionsAside();
   std::int64_t indexBytes() const noexcept;
-  std::filesystem::path companion(const char* suffix) const { return path_.string() + suffix; }
   std::filesystem::path freeName(const std::string& suffix) const;
 
   const std::filesystem::path path_;
+  // The companions' names are made once, as every transaction asks for them and no memory may be missing then.
+  const std::filesystem::path log_;
+  const std::filesystem::path index_;
   const platform::Clock& clock_;
   Identity opened_;
   Identity good_;
