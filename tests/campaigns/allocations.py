@@ -35,6 +35,7 @@ class Polite:
         self.answers, self.refused, self.settled = [], set(), FIRST - 1
         self.client = service.connect(PATIENCE)
         begin_session(self.client, key)
+        self.say()  # the start, which isn't answered before the stop, is served when this is
 
     def say(self):
         number = self.next
@@ -118,8 +119,18 @@ class Trials:
         except (wire.WireError, wire.Refused, OSError) as problem:
             if self.service.ends_within(2):
                 return self.death()
+            why = f"the other client isn't served: {problem}; cut {self.cuts()}; {self.last_line()}"
             self.service.kill()  # the next trial begins anew
-            return f"the other client isn't served: {problem}"
+            return why
+
+    def cuts(self):
+        """Why connections were cut so far, as the service counts it."""
+        try:
+            with self.service.connect(PATIENCE) as fresh:
+                cut = fresh.call(wire.STATUS)["connections_cut"]
+        except (wire.WireError, wire.Refused, OSError) as problem:
+            return f"unknown ({problem})"
+        return {reason: count for reason, count in cut.items() if count}
 
     def what_is_left(self, fresh):
         """What the service still has of a client that is gone; it may take a moment to end it."""
@@ -141,8 +152,11 @@ class Trials:
 
     def death(self):
         self.figures["deaths"] += 1
+        return f"the service died with {self.service.process.returncode}: {self.last_line()}"
+
+    def last_line(self):
         lines = self.service.log_text().strip().splitlines()
-        return f"the service died with {self.service.process.returncode}: {lines[-1][-200:] if lines else 'no line'}"
+        return lines[-1][-200:] if lines else "no line"
 
     def account(self):
         """The polite client that is connected now must find all it said. Ends the service in order."""

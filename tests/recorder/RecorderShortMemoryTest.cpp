@@ -1,8 +1,11 @@
 // What the recorder does when memory is missing: for an event that is handed over, in the writer, for an answer.
 #include <algorithm>
+#include <fstream>
 #include <string>
+#include <vector>
 
 #include "recorder/LateReplies.h"
+#include "recorder/store/files/StateUsage.h"
 #include "testing/ManualWorkQueues.h"
 #include "tests/recorder/RecorderFixture.h"
 #include "tests/support/FailingAllocations.h"
@@ -155,6 +158,18 @@ TEST_F(RecorderShortMemory, AnAnswerThatThereIsNoneForComesLater) {
   recorder_->settle(queue, [&answered] { answered = true; });
   EXPECT_TRUE(eventually([&] { return queue->isDone(); }));
   EXPECT_TRUE(answered);
+}
+
+TEST_F(RecorderShortMemory, ALookAtTheStateDirectoryIsGivenUpWithoutEndingTheProcess) {
+  std::filesystem::create_directories(file().parent_path());
+  for (const char* const name : {".damaged-1", ".damaged-2"}) {
+    std::ofstream(file().string() + name) << std::string(3000, 'x');
+  }
+  std::vector<std::string> removed{"not looked yet"};
+  StateUsage usage(file(), {file().parent_path()}, 1'000'000);
+  const int failed = tarn::testing::failEachAllocation([&] { removed = usage.tidy(); }, [] {});
+  EXPECT_GT(failed, 5);
+  EXPECT_TRUE(removed.empty());
 }
 
 TEST(LateRepliesShortMemory, AReplyThatThereIsNoneForLeavesTheOthersInTheirOrder) {

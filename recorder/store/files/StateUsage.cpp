@@ -1,12 +1,18 @@
 #include "recorder/store/files/StateUsage.h"
 
+#include <dirent.h>
+#include <fcntl.h>
 #include <sys/stat.h>
 #include <sys/sysmacros.h>
 #include <unistd.h>
 
 #include <algorithm>
+#include <cerrno>
 #include <fstream>
+#include <memory>
+#include <new>
 #include <sstream>
+#include <string_view>
 #include <system_error>
 #include <tuple>
 
@@ -24,14 +30,20 @@ struct Found {
   std::int64_t changed = 0;
 };
 
-std::vector<Found> filesOf(const std::filesystem::path& folder, const std::string& prefix) {
+// By the system's own calls: the standard library's walk ends the process when no memory is left for a name.
+std::vector<Found> filesOf(const std::filesystem::path& folder, std::string_view prefix) {
   std::vector<Found> found;
-  std::error_code error;
-  for (std::filesystem::directory_iterator entry(folder, error), end; !error && entry != end; entry.increment(error)) {
+  const std::unique_ptr<DIR, int (*)(DIR*)> entries(::opendir(folder.c_str()), &::closedir);
+  if (entries == nullptr) {
+    if (errno == ENOMEM) throw std::bad_alloc();
+    return found;
+  }
+  while (const dirent* const entry = ::readdir(entries.get())) {
     struct stat status {};
-    if (!entry->path().filename().string().starts_with(prefix)) continue;
-    if (::lstat(entry->path().c_str(), &status) != 0 || !S_ISREG(status.st_mode)) continue;
-    found.push_back({entry->path(), std::int64_t{status.st_size},
+    if (!std::string_view(entry->d_name).starts_with(prefix)) continue;
+    if (::fstatat(::dirfd(entries.get()), entry->d_name, &status, AT_SYMLINK_NOFOLLOW) != 0) continue;
+    if (!S_ISREG(status.st_mode)) continue;
+    found.push_back({folder / entry->d_name, std::int64_t{status.st_size},
                      std::int64_t{status.st_mtim.tv_sec} * 1'000'000'000 + status.st_mtim.tv_nsec});
   }
   return found;
