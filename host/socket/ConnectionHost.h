@@ -34,6 +34,8 @@ class OpenConnection {
   virtual void endInput() = 0;
   // Tells its user's quotas what its sessions' logs take now, which others' messages change too.
   virtual void noteLogBytes() = 0;
+  // The host ends now, and is asked for nothing afterwards, whoever holds the connection still.
+  virtual void leaveHost() noexcept = 0;
 };
 
 class ConnectionHost {
@@ -57,6 +59,12 @@ class ConnectionHost {
   }
   ConnectionHost(const ConnectionHost&) = delete;
   ConnectionHost& operator=(const ConnectionHost&) = delete;
+  // Leaves the connections that are open still, as at an end whose time was up, to whoever holds them.
+  ~ConnectionHost() {
+    for (OpenConnection* connection : std::exchange(open_, {})) {
+      connection->leaveHost();
+    }
+  }
 
   // The answer to `status`; without one it is the ledger alone, as in tests. Asked at the request, so what it costs
   // holds up everybody.

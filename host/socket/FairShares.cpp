@@ -12,6 +12,13 @@ constexpr std::size_t kKeptUsers = 256;
 
 }  // namespace
 
+FairShares::~FairShares() {
+  for (const std::shared_ptr<ShareParty>& party : parties_) {
+    party->fresh.clear();
+    party->seats.clear();
+  }
+}
+
 std::shared_ptr<ShareParty> FairShares::partyOf(std::uint32_t user) {
   if (byUser_.size() > kKeptUsers) {
     std::erase_if(byUser_, [](const auto& entry) { return entry.second.expired(); });

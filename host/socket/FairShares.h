@@ -119,6 +119,8 @@ class FairShares {
   FairShares() = default;
   FairShares(const FairShares&) = delete;
   FairShares& operator=(const FairShares&) = delete;
+  // Lets go of those that wait still, who hold the user in whose lines they stand.
+  ~FairShares();
 
   // The user's own, shared by all holders that live; made on first sight. Users that are gone are forgotten now and
   // then.

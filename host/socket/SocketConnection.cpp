@@ -72,6 +72,14 @@ void SocketConnection::refuse(std::string why) {
   resume();
 }
 
+void SocketConnection::leaveHost() noexcept {
+  const auto self = shared_from_this();  // the loop may be the last one that holds it
+  rings_.reset();
+  if (std::exchange(watchedEvents_, 0) != 0) {
+    host_.loop.unwatch(socket_.get());
+  }
+}
+
 // Keeps the system's idea of what to wait for in step; asks it only when something changes.
 void SocketConnection::watch(std::uint32_t events) {
   if (events == watchedEvents_) return;

@@ -78,6 +78,7 @@ class SocketConnection final : public platform::Connection,
   // Shuts the socket's reading side; the end then comes the way it always does.
   void endInput() override;
   void noteLogBytes() override;
+  void leaveHost() noexcept override;
   Turn takeTurn(std::int64_t credit) override;
   void finishWork() override;
   // Cuts the connection off.

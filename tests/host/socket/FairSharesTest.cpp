@@ -244,5 +244,18 @@ TEST_F(FairSharesTest, UsersThatAreGoneAreForgotten) {
   EXPECT_EQ(shares_.partyOf(7), first);
 }
 
+TEST(FairShares, LetsGoOfThoseThatWaitWhenItEnds) {
+  std::vector<std::string> done;
+  std::weak_ptr<Pieces> waiting;
+  {
+    FairShares shares;
+    const auto made = std::make_shared<Pieces>(shares.partyOf(1), "waiting", done);
+    made->left = 1;
+    shares.ready(made);
+    waiting = made;
+  }
+  EXPECT_TRUE(waiting.expired());
+}
+
 }  // namespace
 }  // namespace tarn::linux_host
