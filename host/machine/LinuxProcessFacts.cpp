@@ -158,10 +158,10 @@ Result<std::uint64_t> LinuxProcessFacts::physicalFootprint() const {
 }
 
 ThermalState LinuxProcessFacts::thermalState() const {
-  const std::string folder = sysRoot_ + "/class/thermal";
+  const std::string folder = sysRoot_ + "/class/thermal/";
   ThermalState worst = ThermalState::Nominal;
   for (const std::string& zone : namesIn(folder, "thermal_zone")) {
-    worst = std::max(worst, zoneState(folder + "/" + zone));
+    worst = std::max(worst, zoneState(std::string(folder).append(zone)));
   }
   return worst;
 }
