@@ -30,6 +30,7 @@ class ProcessFacts;
 class PylonService;
 class RandomSource;
 class RtcReportingService;
+class SessionRecords;
 class Signposts;
 class SnareService;
 class TallyService;
@@ -98,6 +99,8 @@ struct Facilities {
   AccessoryQueries* accessories = nullptr;
   Signposts* signposts = nullptr;     // null: nothing ever records
   OverflowStore* overflow = nullptr;  // null: what is beyond the memory's bound stays there
+  // Which sessions there were, and whose work is done.
+  SessionRecords* sessionRecords = nullptr;  // null: nobody keeps them
 };
 
 }  // namespace tarn::platform

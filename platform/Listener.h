@@ -23,6 +23,10 @@ class Connection {
   // The peer's process ID, as the kernel saw it when the peer connected; 0 when it lies outside of our process
   // namespace. By now another process may have it.
   virtual std::int32_t processIdentifier() const = 0;
+  // By which the platform tells its connections apart, from 1; no number is given twice.
+  virtual std::int64_t number() const = 0;
+  // The peer's user, as the kernel saw it likewise; its greatest value when that isn't known.
+  virtual std::uint32_t userIdentifier() const = 0;
   // A short text for the log: which peer this is. UTF-8, without a line end.
   virtual std::string description() const = 0;
   // The object that serves the peer's requests, held until the connection is over. Set before resume().

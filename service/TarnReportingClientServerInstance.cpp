@@ -47,6 +47,12 @@ void onServerQueue(platform::Work work) {
   TarnReportingUtilityGetReportingServerQueue()->async(std::move(work));
 }
 
+// How sessions end whose client ends so.
+platform::SessionEnd sessionEndOf(TarnReportingClientEnd end) noexcept {
+  return end == TarnReportingClientEnd::ServiceStopping ? platform::SessionEnd::ServiceStopping
+                                                        : platform::SessionEnd::ClientGone;
+}
+
 // Sends the reply that a start call left with the session, if there is one.
 void sendHeldReply(TarnReportingSession& session) {
   if (platform::Acknowledge held = std::move(session.transactionCompleteBlock())) {
@@ -203,7 +209,8 @@ std::shared_ptr<TarnReportingSession> TarnReportingClientServerInstance::findRep
 }
 
 std::shared_ptr<TarnReportingSession> TarnReportingClientServerInstance::makeSession(std::int64_t reporterID) {
-  auto session = TarnReportingSession::initWithID(reporterID, {processIdentifier_});
+  auto session = TarnReportingSession::initWithID(
+      reporterID, {processIdentifier_}, TarnReportingSession::Mode::Ordinary, {connection_, user_, clientProcessName_});
   session->setClientProcessName(clientProcessName_);
   session->setLogAccount(logAccount_);
   return session;
@@ -230,7 +237,11 @@ void TarnReportingClientServerInstance::logReportingSessions() {
 void TarnReportingClientServerInstance::create(std::int64_t reporterID) {
   kLog(LogLevel::Default, "creating session for reporter %lli", reporterID);
   trace(kTraceCreate, reporterID);
-  sessions_.store(reporterID, makeSession(reporterID));
+  auto session = makeSession(reporterID);
+  if (const auto earlier = sessions_.find(reporterID)) {
+    earlier->chronicle().end(platform::SessionEnd::Replaced);
+  }
+  sessions_.store(reporterID, std::move(session));
   kLog(LogLevel::Default, "session created for reporter %lli", reporterID);
 }
 
@@ -246,6 +257,7 @@ void TarnReportingClientServerInstance::retype(std::uint16_t serviceType, std::i
     replacement->updateConfigurationWithContentsOfConfiguration(&session->configuration());
     replacement->previousValues().merge(session->previousValues());
     replacement->setServiceType(type);
+    session->chronicle().end(platform::SessionEnd::Retyped);
     sessions_.store(reporterID, replacement);
   }
   kLog(LogLevel::Default, "service type %i set for reporter  %lli", serviceType, reporterID);
@@ -293,8 +305,11 @@ void TarnReportingClientServerInstance::stop(std::int64_t reporterID) {
 
 void TarnReportingClientServerInstance::destroy(std::int64_t reporterID) {
   kLog(LogLevel::Default, "destroying session for reporter %lli", reporterID);
-  if (const auto session = sessions_.find(reporterID); session && session->started()) {
-    stopSession(*session);
+  if (const auto session = sessions_.find(reporterID)) {
+    if (session->started()) {
+      stopSession(*session);
+    }
+    session->chronicle().end(platform::SessionEnd::Destroyed);
   }
   sessions_.remove(reporterID);
   kLog(LogLevel::Default, "destroying %lli", reporterID);
@@ -312,6 +327,7 @@ void TarnReportingClientServerInstance::endClient() {
       end != TarnReportingClientEnd::ClientGone && !std::exchange(endTold_, true)) {
     kLog(LogLevel::Default, "ending client %i. reason=%s", processIdentifier_, TarnReportingClientEndName(end));
   }
+  const platform::SessionEnd sessionEnd = sessionEndOf(service->clientEnd());
   const auto rest = [self = shared_from_this()] { self->endClient(); };
   while (const auto session = sessions_.firstRunning()) {
     try {
@@ -320,12 +336,14 @@ void TarnReportingClientServerInstance::endClient() {
       kLog(LogLevel::Error, "no memory to stop session %lli, it is dropped", session->reporterID());
       sessions_.remove(session->reporterID());
     }
+    session->chronicle().end(sessionEnd);
     if (sessions_.size() > 1 && TarnReportingSpend(kStopCost)) {
       TarnReportingContinueLater(rest);
       return;
     }
   }
   while (const auto session = sessions_.first()) {
+    session->chronicle().endUnlessStopped(sessionEnd);
     sessions_.remove(session->reporterID());
     if (sessions_.size() % kRemovalsAtOnce == 1 && TarnReportingSpend(kRemovalsAtOnce)) {
       TarnReportingContinueLater(rest);

@@ -81,8 +81,8 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
   // two clients use comes twice. The list is made in slices: a session that is there all the while is in it once. The
   // single-message session is no client's and not in it.
   void getAllReporters(platform::Reply<std::vector<std::int64_t>> reply) override;
-  // Ends the process with exit status 2, with no reply and no session stopped. What the back-ends hold by then is
-  // theirs to bring to the disk. Any client may ask for it.
+  // Ends the process with exit status 2, with no reply and no session stopped; the session records aren't told of ends
+  // either. What the back-ends hold by then is theirs to bring to the disk. Any client may ask for it.
   void killService() override;
   // What the connection's quotas look at before they let a request in; see host/socket/Quotas.h. `logBytes` is the
   // estimated memory of the logged messages of all of this client's sessions, those included that were replaced while
@@ -106,6 +106,11 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
 
   // The process at the other end, as the connection told it when it was accepted.
   std::int32_t processIdentifier() const noexcept { return processIdentifier_; }
+  // Which connection it is and whose, for the session records; set by the service before anything is asked of it.
+  void setConnection(std::int64_t number, std::uint32_t user) noexcept {
+    connection_ = number;
+    user_ = user;
+  }
   // For who lists or counts sessions; only the instance changes the map.
   const TarnReportingSessionMap& clientReportingSessionMap() const noexcept { return sessions_; }
   // When the connection was accepted, in epoch seconds; set by the service.
@@ -139,6 +144,8 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
   void endClient();
 
   const std::int32_t processIdentifier_;
+  std::int64_t connection_ = 0;  // 0 and 0 while nobody said
+  std::uint32_t user_ = 0;
   const std::weak_ptr<TarnReportingServiceDelegateProtocol> delegate_;
 
   // Server queue only. Nothing until the service's own work has listed the client; only the uptime in the client's last

@@ -113,6 +113,7 @@ bool TarnReportingService::listenerShouldAcceptNewConnection(const std::shared_p
   {
     const MutexLock lock(mutex_);
     client = TarnReportingClientServerInstance::initWithPID(processIdentifier, weak_from_this());
+    client->setConnection(connection->number(), connection->userIdentifier());
     connection->setExportedObject(client);
   }
   TarnReportingUtilityGetReportingServerQueue()->async([self = shared_from_this(), client, processIdentifier] {

@@ -22,6 +22,23 @@ constexpr std::uint32_t kTraceStarted = 0x2104482C;
 constexpr std::uint32_t kTraceStopped = 0x21044830;
 constexpr std::uint32_t kTraceDestroyed = 0x21044834;
 
+// A single-message session has none: it takes the messages of many clients, of whom none opened it.
+platform::SessionRecords* recordsFor(TarnReportingSession::Mode mode) {
+  return mode == TarnReportingSession::Mode::Ordinary ? TarnReportingFacilities().sessionRecords : nullptr;
+}
+
+platform::SessionFacts factsOf(std::int64_t reporterID, const std::vector<std::int32_t>& processIdentifiers,
+                               const TarnReportingSession::Opener& opener, std::string_view serviceName) {
+  platform::SessionFacts facts;
+  facts.reporter = reporterID;
+  facts.connection = opener.connection;
+  facts.pid = processIdentifiers.empty() ? 0 : processIdentifiers.front();
+  facts.uid = opener.user;
+  facts.process = opener.process;
+  facts.serviceName = serviceName;
+  return facts;
+}
+
 // The table of worker classes and, once the first session is made, the lists derived from it.
 struct ClassLists {
   std::span<const TarnReportingSessionWorkerClass> all;
@@ -52,14 +69,15 @@ const TarnReportingSessionWorkerClasses& TarnReportingSession::workerClasses() {
 
 std::shared_ptr<TarnReportingSession> TarnReportingSession::initWithID(std::int64_t reporterID,
                                                                        std::vector<std::int32_t> processIdentifiers,
-                                                                       Mode mode) {
+                                                                       Mode mode, const Opener& opener) {
   TarnReportingRequireServerQueue();
   struct Constructible : TarnReportingSession {
-    Constructible(std::int64_t theID, std::vector<std::int32_t> identifiers, Mode theMode)
-        : TarnReportingSession(theID, std::move(identifiers), theMode) {}
+    Constructible(std::int64_t theID, std::vector<std::int32_t> identifiers, Mode theMode, const Opener& theOpener)
+        : TarnReportingSession(theID, std::move(identifiers), theMode, theOpener) {}
   };
   std::shared_ptr<TarnReportingSession> session =
-      std::make_shared<Constructible>(reporterID, std::move(processIdentifiers), mode);
+      std::make_shared<Constructible>(reporterID, std::move(processIdentifiers), mode, opener);
+  const platform::SessionScope scope = session->chronicle_.enter();
   session->workers_.startWorkersFromClasses(workerClasses().startOnInitWorkerClasses, session);
   kLog(LogLevel::Info, "created reporting session for ID: %lli", reporterID);
   trace(kTraceCreated, reporterID);
@@ -67,34 +85,58 @@ std::shared_ptr<TarnReportingSession> TarnReportingSession::initWithID(std::int6
 }
 
 TarnReportingSession::TarnReportingSession(std::int64_t reporterID, std::vector<std::int32_t> processIdentifiers,
-                                           Mode mode)
+                                           Mode mode, const Opener& opener)
     : reporterID_(reporterID),
       processIdentifiers_(std::move(processIdentifiers)),
       mode_(mode),
       serviceName_(TarnReportingUtilityGenerateServiceNameFromServiceType(serviceType_)),
+      chronicle_(recordsFor(mode), factsOf(reporterID, processIdentifiers_, opener, serviceName_)),
       log_(reporterID) {}
 
 TarnReportingSession::~TarnReportingSession() {
   kLog(LogLevel::Info, "deallocing this session %lli", reporterID_);
   trace(kTraceDestroyed, reporterID_);
+  const platform::SessionScope scope = chronicle_.enter();
+  workers_.release();
 }
 
 void TarnReportingSession::setServiceType(AudioServiceType serviceType) {
   TarnReportingRequireServerQueue();
+  const platform::SessionScope scope = chronicle_.enter();
   serviceType_ = serviceType;
   serviceName_ = TarnReportingUtilityGenerateServiceNameFromServiceType(serviceType);
   kLog(LogLevel::Info, "setting service type %@", serviceName_);
+  describe();
 }
 
 void TarnReportingSession::updateConfigurationWithContentsOfConfiguration(const plist::Dictionary* configuration) {
   TarnReportingRequireServerQueue();
   static const plist::Key kMirrored("KvHostApplicationDisplayID");
   if (configuration == nullptr) return;
+  const platform::SessionScope scope = chronicle_.enter();
   configuration_.set(keys::kHostApplicationDisplayID, configuration->get(kMirrored));
   configuration_.merge(*configuration);
+  describe();
+}
+
+void TarnReportingSession::setClientProcessName(std::string name) {
+  clientProcessName_ = std::move(name);
+  describe();
+}
+
+void TarnReportingSession::describe() {
+  if (!chronicle_.isKept()) return;
+  platform::SessionFacts facts = chronicle_.facts();
+  facts.process = clientProcessName_;
+  const plist::ValueView application = configuration_.get(keys::kHostApplicationDisplayID);
+  facts.application = application ? application.asText() : std::string();
+  facts.serviceType = static_cast<std::int64_t>(serviceType_);
+  facts.serviceName = serviceName_;
+  chronicle_.describe(std::move(facts));
 }
 
 void TarnReportingSession::start() {
+  const platform::SessionScope scope = chronicle_.enter();
   appendMarker(AudioEventType::Start, "start");
   kLog(LogLevel::Info, "start called. reporterID=%lli", reporterID_);
   if (started_) {
@@ -110,11 +152,13 @@ void TarnReportingSession::start() {
   } starting{started_};
   started_ = true;
   trace(kTraceStarted, reporterID_);
+  chronicle_.start();
   workers_.startWorkersFromClasses(workerClasses().initializableWorkerClasses, shared_from_this());
   starting.failed = false;
 }
 
 void TarnReportingSession::stop() {
+  const platform::SessionScope scope = chronicle_.enter();
   appendMarker(AudioEventType::Stop, "stop");
   kLog(LogLevel::Debug, "stop called. reporterID=%lli", reporterID_);
   if (!started_) return;
@@ -125,6 +169,7 @@ void TarnReportingSession::stop() {
   log_.clear();
   totalMessageCount_ = 0;
   started_ = false;
+  chronicle_.stop();
 }
 
 void TarnReportingSession::appendMarker(AudioEventType type, std::string_view method) {

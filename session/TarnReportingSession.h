@@ -17,6 +17,7 @@
 #include "platform/TarnReportingServiceProtocol.h"
 #include "plist/Dictionary.h"
 #include "service/vocabulary/TarnReportingVocabulary.h"
+#include "session/TarnReportingSessionChronicle.h"
 #include "session/TarnReportingSessionMessageLog.h"
 #include "session/TarnReportingSessionPreviousValues.h"
 #include "session/TarnReportingSessionWorkerSet.h"
@@ -33,6 +34,7 @@ class TarnReportingSession : public std::enable_shared_from_this<TarnReportingSe
     SingleMessage,  // for messages without a reporter ID: only the workers that accept it are made
   };
   using MessagePointer = std::shared_ptr<TarnReportingSessionMessage>;
+  using Opener = TarnReportingSessionOpener;
 
   // Hands over the table of worker classes for as long as the facilities are installed; it must outlive every session.
   // Before the first session is made. The lists that sessions go by are derived when the first one is made. A later
@@ -43,14 +45,14 @@ class TarnReportingSession : public std::enable_shared_from_this<TarnReportingSe
 
   // A session with its start-on-creation workers running. It has no service type (65535), no configuration and no name
   // of its client. `processIdentifiers` are those that the session reports for, the owner's first. Logs the ID at info
-  // level.
+  // level. The session records are told of every session but a single-message one: no client opened that.
   static std::shared_ptr<TarnReportingSession> initWithID(std::int64_t reporterID,
                                                           std::vector<std::int32_t> processIdentifiers,
-                                                          Mode mode = Mode::Ordinary);
+                                                          Mode mode = Mode::Ordinary, const Opener& opener = {});
   TarnReportingSession(const TarnReportingSession&) = delete;
   TarnReportingSession& operator=(const TarnReportingSession&) = delete;
-  // Releases the workers without stopping them. So a session that was replaced while it ran reports nothing of what it
-  // had gathered. Logs the ID at info level.
+  // Releases the workers without stopping them, as work of this session. So a session that was replaced while it ran
+  // reports nothing of what it had gathered. Logs the ID at info level.
   ~TarnReportingSession();
 
   // Which workers run is not touched: the workers that need the type are made at start. Any number is taken; one
@@ -61,7 +63,7 @@ class TarnReportingSession : public std::enable_shared_from_this<TarnReportingSe
   // ones, and keys that aren't mentioned stay: nothing takes a key away.
   void updateConfigurationWithContentsOfConfiguration(const plist::Dictionary* configuration);
   // For the description and the session's summary; an empty one counts as not known.
-  void setClientProcessName(std::string name) { clientProcessName_ = std::move(name); }
+  void setClientProcessName(std::string name);
 
   // Appends the start marker, then makes and starts every worker that applies and doesn't run yet: consumers, then
   // producers, then the rest, each kind in the table's order. A session that runs gets a further marker, and nothing
@@ -139,14 +141,20 @@ class TarnReportingSession : public std::enable_shared_from_this<TarnReportingSe
   const TarnReportingSessionWorkerSet& workers() const noexcept { return workers_; }
   std::size_t workerInstanceCount() const noexcept { return workers_.messageWorkers().size(); }
 
+  // What the session records are told of this session. Who lets go of it says here how it ended.
+  TarnReportingSessionChronicle& chronicle() noexcept { return chronicle_; }
+
   // The pending reply of the client's start call; kept here for the connection, never called by the session. Empty when
   // no start call waits.
   platform::Acknowledge& transactionCompleteBlock() noexcept { return transactionCompleteBlock_; }
 
  private:
-  TarnReportingSession(std::int64_t reporterID, std::vector<std::int32_t> processIdentifiers, Mode mode);
+  TarnReportingSession(std::int64_t reporterID, std::vector<std::int32_t> processIdentifiers, Mode mode,
+                       const Opener& opener);
   // The process's lists, derived from the table on first use.
   static const TarnReportingSessionWorkerClasses& workerClasses();
+  // Tells the chronicle what became known.
+  void describe();
   // A stamped and tagged marker of this type; `method` is "start" or "stop" and the end of its keys.
   void appendMarker(AudioEventType type, std::string_view method);
 
@@ -159,6 +167,7 @@ class TarnReportingSession : public std::enable_shared_from_this<TarnReportingSe
   plist::Dictionary configuration_;
   std::string clientProcessName_;
   std::int64_t totalMessageCount_ = 0;
+  TarnReportingSessionChronicle chronicle_;
   platform::Acknowledge transactionCompleteBlock_;
   TarnReportingSessionPreviousValues previousValues_;
   TarnReportingSessionMessageLog log_;

@@ -39,6 +39,7 @@ std::string withoutBlanks(std::string_view key) {
 std::size_t TarnReportingSession::sendMessage(const MessagePointer& message, platform::Reply<> reply) {
   assert(TarnReportingIsOnServerQueue());
   const TarnReportingSignpost signpost(SignpostCategory::Message, kModule, "sendMessage", {"reporterID", reporterID_});
+  const platform::SessionScope scope = chronicle_.enter();
   ++totalMessageCount_;
   addMissingDates(*message);
   removeWhiteSpaceFromKeys(*message);
@@ -47,6 +48,7 @@ std::size_t TarnReportingSession::sendMessage(const MessagePointer& message, pla
   TarnReportingFacilities().tracePoints.emit(kTraceMessage, reporterID_);
   message->setIsSessionStarted(started_);
   message->setIsRedundant(messageIsRedundant(*message));
+  chronicle_.count(message->isRedundant());
   kLog(
       LogLevel::Debug, "TarnReportingSessionWorker action=sendMessage reporterID=%lli app=%@ redundant=%@ message=%@",
       reporterID_, [&] { return TarnReportingUtilityRetrieveAppName(configuration_); },

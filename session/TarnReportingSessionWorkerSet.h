@@ -48,6 +48,9 @@ class TarnReportingSessionWorkerSet {
   // worker sends meanwhile.
   std::size_t deliver(const std::shared_ptr<TarnReportingSessionMessage>& message, std::int64_t reporterID) const;
 
+  // Lets go of them without stopping them.
+  void release() noexcept { messageWorkers_.clear(); }
+
   // Every worker, in the order of creation.
   const std::vector<Member>& messageWorkers() const noexcept { return messageWorkers_; }
 

@@ -13,12 +13,15 @@ namespace tarn::testing {
 
 class FakeConnection final : public platform::Connection, public std::enable_shared_from_this<FakeConnection> {
  public:
-  explicit FakeConnection(std::int32_t processIdentifier) : processIdentifier_(processIdentifier) {}
+  explicit FakeConnection(std::int32_t processIdentifier, std::int64_t number = 1, std::uint32_t user = 1000)
+      : processIdentifier_(processIdentifier), number_(number), user_(user) {}
   FakeConnection(const FakeConnection&) = delete;
   FakeConnection& operator=(const FakeConnection&) = delete;
 
   // The interface.
   std::int32_t processIdentifier() const override { return processIdentifier_; }
+  std::int64_t number() const override { return number_; }
+  std::uint32_t userIdentifier() const override { return user_; }
   std::string description() const override;
   void setExportedObject(std::shared_ptr<platform::TarnReportingServiceProtocol> object) override;
   void setInterruptionHandler(Handler handler) override;
@@ -46,6 +49,8 @@ class FakeConnection final : public platform::Connection, public std::enable_sha
 
  private:
   const std::int32_t processIdentifier_;
+  const std::int64_t number_;
+  const std::uint32_t user_;
   std::shared_ptr<platform::TarnReportingServiceProtocol> exportedObject_;
   Handler interruptionHandler_;
   Handler invalidationHandler_;

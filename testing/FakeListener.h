@@ -21,7 +21,8 @@ class FakeListener final : public platform::Listener {
   void resume() override { resumed_ = true; }
 
   // Controls.
-  // Connects a client with this process ID; null when the listener isn't resumed, has no delegate or was told no.
+  // Connects a client with this process ID, of the user 1000; the connections are numbered from 1. Null when the
+  // listener isn't resumed, has no delegate or was told no.
   std::shared_ptr<FakeConnection> connect(std::int32_t processIdentifier);
 
   // Observations.
@@ -32,6 +33,7 @@ class FakeListener final : public platform::Listener {
  private:
   std::weak_ptr<platform::ListenerDelegate> delegate_;
   bool resumed_ = false;
+  std::int64_t lastNumber_ = 0;
   std::vector<std::shared_ptr<FakeConnection>> connections_;
 };
 

@@ -33,7 +33,8 @@ FakePlatform::FakePlatform()
                   &perfDataWriters,
                   &accessories,
                   &signposts,
-                  &overflow} {
+                  &overflow,
+                  &sessionRecords} {
   const auto record = [this](auto&... fakes) { (fakes.recordOrderIn(order), ...); };
   record(log, conditions, defaults, notifications, commandRunner, wattlog, pylon, snare, tattle, gyre, flume);
   TarnReportingInstallFacilities(&facilities_);

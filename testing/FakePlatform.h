@@ -39,6 +39,7 @@
 #include "testing/backends/FakeTraceAnalysis.h"
 #include "testing/backends/FakeWattlogService.h"
 #include "testing/backends/OrderRecord.h"
+#include "testing/backends/RecordingSessionRecords.h"
 
 namespace tarn::testing {
 
@@ -86,6 +87,7 @@ class FakePlatform {
   FakeAccessoryQueries accessories;
   FakeSignposts signposts;
   FakeOverflowStore overflow;
+  RecordingSessionRecords sessionRecords;
   FakeListener listener;
 
  private:

@@ -14,6 +14,7 @@
 
 #include "testing/ManualClock.h"
 #include "testing/backends/OwnMemory.h"
+#include "testing/backends/RecordingSessionRecords.h"
 
 namespace tarn::testing {
 
@@ -36,7 +37,7 @@ class ManualSchedule {
   void add(std::size_t queue, platform::Work work) {
     const std::lock_guard lock(mutex_);
     promoteDue();
-    ready_.push_back({queue, std::move(work)});
+    ready_.push_back(Piece{queue, std::move(work)});
   }
   void addDelayed(std::size_t queue, std::chrono::nanoseconds delay, platform::Work work) {
     const std::lock_guard lock(mutex_);
@@ -46,7 +47,8 @@ class ManualSchedule {
   }
   void suspend(std::size_t queue, std::chrono::nanoseconds longest, platform::Work next) {
     const std::lock_guard lock(mutex_);
-    suspended_[queue] = {clock_.monotonic() + std::max(longest, std::chrono::nanoseconds(0)), std::move(next)};
+    suspended_[queue] = {clock_.monotonic() + std::max(longest, std::chrono::nanoseconds(0)),
+                         Piece{queue, std::move(next)}};
   }
   void resume(std::size_t queue) {
     const std::lock_guard lock(mutex_);
@@ -77,18 +79,20 @@ class ManualSchedule {
   }
 
   bool runOne(Filter filter) {
-    platform::Work work = takeNext(filter);
+    Piece piece = takeNext(filter);
+    platform::Work& work = piece.work;
     if (!work) return false;
     // Also when the work throws, whose queue goes on with the next piece then.
     struct Running {
       ManualSchedule& schedule;
       platform::Work& work;
+      const RecordingSessionRecords::Scope scope;
       ~Running() {
         work.reset();  // still as work of its queue
         const std::lock_guard lock(schedule.mutex_);
         schedule.running_.pop_back();
       }
-    } const running{*this, work};
+    } const running{*this, work, RecordingSessionRecords::Scope(piece.owner)};
     work();
     return true;
   }
@@ -131,18 +135,19 @@ class ManualSchedule {
 
  private:
   struct Piece {
-    std::size_t queue;
+    std::size_t queue = 0;
     platform::Work work;
+    platform::SessionNumber owner = RecordingSessionRecords::current();  // of whoever hands it over
   };
 
   struct Suspension {
     std::chrono::nanoseconds due{};
-    platform::Work next;
+    Piece next;
   };
   using Suspensions = std::map<std::size_t, Suspension>;
 
   // The oldest piece of due work that can run, which counts as running from now on; empty when there is none.
-  platform::Work takeNext(Filter filter) {
+  Piece takeNext(Filter filter) {
     const OwnMemory own;
     const std::lock_guard lock(mutex_);
     promoteDue();
@@ -151,15 +156,15 @@ class ManualSchedule {
              std::find(running_.begin(), running_.end(), piece.queue) == running_.end();
     });
     if (next == ready_.end()) return {};
-    platform::Work work = std::move(next->work);
-    running_.push_back(next->queue);
+    Piece piece = std::move(*next);
+    running_.push_back(piece.queue);
     runner_ = std::this_thread::get_id();
     ready_.erase(next);
-    return work;
+    return piece;
   }
   static bool matches(const Piece& piece, Filter filter) { return !filter || piece.queue == *filter; }
   Suspensions::iterator endSuspension(Suspensions::iterator at) {
-    ready_.push_front({at->first, std::move(at->second.next)});
+    ready_.push_front(std::move(at->second.next));
     return suspended_.erase(at);
   }
   void promoteDue() {

@@ -5,6 +5,8 @@
 // up stays where it is, work of the others runs. So a piece of work that waits for a back-end can let the back-end
 // work.
 //
+// A piece of work runs for the session for which it was handed over, as on a machine (RecordingSessionRecords).
+//
 // The server queue (the user-interactive one) is the test's own: while no work runs, the thread that made the queues
 // counts as running work of it, so a test calls what is bound to that queue directly.
 //

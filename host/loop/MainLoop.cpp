@@ -109,7 +109,9 @@ void MainLoop::waitForEvents() {
 
 void MainLoop::waitUntil(std::chrono::nanoseconds deadline, platform::UniqueFunction<bool()> isOver) {
   if (std::exchange(waits_, true)) return;
-  const WorkLane::Scope nobodys(nullptr);  // what comes meanwhile isn't the work of whoever waits
+  // What comes meanwhile isn't the work of whoever waits.
+  const WorkLane::Scope noLane(nullptr);
+  const WorkOwner noSession(0);
   while (!isOver() && !stopping_.load(std::memory_order_relaxed)) {
     flushAll();
     const auto left = deadline - clock_.monotonic();

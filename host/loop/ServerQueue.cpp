@@ -31,7 +31,7 @@ void ServerQueue::async(platform::Work work) {
   bool wakeServer = false;
   {
     const MutexLock lock(mutex_);
-    incoming_.push_back({std::move(work), LogClientScope::current()});
+    incoming_.push_back({OwnedWork::of(std::move(work)), LogClientScope::current()});
     ready_.fetch_add(1, std::memory_order_relaxed);
     wakeServer = mustWake();
   }
@@ -49,7 +49,7 @@ void ServerQueue::asyncAfter(std::chrono::nanoseconds delay, platform::Work work
   bool wakeServer = false;
   {
     const MutexLock lock(mutex_);
-    delayed_.add(deadline, {std::move(work), {}});
+    delayed_.add(deadline, {OwnedWork::of(std::move(work)), {}});
     wakeServer = deadline < sleepsUntil_ && mustWake();
   }
   if (wakeServer) {
@@ -124,7 +124,7 @@ void ServerQueue::runLane(WorkLane& lane) {
   const CurrentQueue current(this);
   const WorkLane::Scope scope(&lane);
   while (!lane.empty() && lane.hasTurn()) {
-    platform::Work work = lane.take();
+    OwnedWork work = lane.take();
     inLanes_.store(inLanes_.load(std::memory_order_relaxed) - 1, std::memory_order_relaxed);
     progress_.step();
     work();

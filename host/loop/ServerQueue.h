@@ -23,6 +23,7 @@
 #include "host/loop/DelayedWork.h"
 #include "host/loop/QueueProgress.h"
 #include "host/loop/WorkLane.h"
+#include "host/loop/WorkOwner.h"
 #include "host/system/UniqueDescriptor.h"
 #include "platform/Clock.h"
 #include "platform/WorkQueue.h"
@@ -39,11 +40,12 @@ class ServerQueue final : public platform::WorkQueue {
   ServerQueue& operator=(const ServerQueue&) = delete;
 
   // Within a lane's scope on the serving thread the work goes to that lane, else to the list, with the client on whose
-  // behalf the caller works. Takes a lock; writes the wake descriptor when the server sleeps.
+  // behalf the caller works. Either way it is done for the session that the caller works for. Takes a lock; writes the
+  // wake descriptor when the server sleeps.
   void async(platform::Work work) override;
-  // From its moment on the piece is like others of the list, and nobody's: it has neither lane nor client, even when a
-  // client's work asked for it. Without a delay it is async(). Wakes the server only when it would have slept past the
-  // moment.
+  // From its moment on the piece is like others of the list, and no client's: it has neither lane nor client, even when
+  // a client's work asked for it. It is still the session's that did. Without a delay it is async(). Wakes the server
+  // only when it would have slept past the moment.
   void asyncAfter(std::chrono::nanoseconds delay, platform::Work work) override;
   // On the serving thread, while it runs pieces or a lane; so also in a handler that a piece which waits on purpose
   // serves, and not in one of an ordinary turn.
@@ -92,7 +94,7 @@ class ServerQueue final : public platform::WorkQueue {
 
  private:
   struct Piece {
-    platform::Work work;
+    OwnedWork work;
     LogClient client;  // on whose behalf it was handed over
   };
 

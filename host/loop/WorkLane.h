@@ -15,6 +15,7 @@
 #include <utility>
 #include <vector>
 
+#include "host/loop/WorkOwner.h"
 #include "platform/WorkQueue.h"
 
 namespace tarn::linux_host {
@@ -44,14 +45,15 @@ class WorkLane {
   }
 
   bool empty() const noexcept { return pieces() == 0; }
-  std::size_t pieces() const noexcept { return pieces_.size() - next_ + (rest_ ? 1 : 0); }
-  void add(platform::Work work) { pieces_.push_back(std::move(work)); }
+  std::size_t pieces() const noexcept { return pieces_.size() - next_ + (rest_.work ? 1 : 0); }
+  // For the session that the caller works for, as that which it puts ahead.
+  void add(platform::Work work) { pieces_.push_back(OwnedWork::of(std::move(work))); }
   // Ahead of what waits. One at a time: the piece that runs gives way once, as the last thing it does.
-  void addNext(platform::Work rest) { rest_ = std::move(rest); }
+  void addNext(platform::Work rest) { rest_ = OwnedWork::of(std::move(rest)); }
   // The next piece; only when there is one.
-  platform::Work take() {
-    if (rest_) return std::move(rest_);
-    platform::Work work = std::move(pieces_[next_++]);
+  OwnedWork take() {
+    if (rest_.work) return std::move(rest_);
+    OwnedWork work = std::move(pieces_[next_++]);
     if (next_ == pieces_.size()) {
       pieces_.clear();
       next_ = 0;
@@ -82,9 +84,9 @@ class WorkLane {
   static inline thread_local WorkLane* current_ = nullptr;
 
   const platform::WorkQueue* queue_;
-  platform::Work rest_;  // of the piece that gave way
+  OwnedWork rest_;  // of the piece that gave way
   // Taken from next_ on; emptied once all are taken, so it is a queue without moving anything.
-  std::vector<platform::Work> pieces_;
+  std::vector<OwnedWork> pieces_;
   // Of pieces_, the first that wasn't taken.
   std::size_t next_ = 0;
   // Of the turn that runs, or of the last one: what it may cost and what it has cost so far.

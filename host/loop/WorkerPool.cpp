@@ -25,7 +25,7 @@ constexpr std::size_t kKeptPieces = 16;
 // How long nobody takes up what is due when there is no memory for it.
 constexpr nanoseconds kShortagePause = std::chrono::milliseconds(1);
 
-void runOne(WorkerPool::Line& line, platform::Work work) {
+void runOne(WorkerPool::Line& line, OwnedWork work) {
   line.waiting.fetch_sub(1, std::memory_order_relaxed);
   MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, work);
 }
@@ -65,7 +65,7 @@ void WorkerPool::stop() {
 // Work holds its queue as a rule, and the queue holds its work: nobody else would ever let go of either.
 void WorkerPool::destroyWhatIsLeft() {
   // Destroyed after the lock: its end may come back here.
-  std::vector<platform::Work> left;
+  std::vector<OwnedWork> left;
   DelayedWork<Delayed> delayed;
   const MutexLock lock(mutex_);
   over_ = true;
@@ -85,7 +85,7 @@ void WorkerPool::destroyWhatIsLeft() {
 void WorkerPool::add(const std::shared_ptr<Line>& line, platform::Work work, Urgency urgency) {
   const MutexLock lock(mutex_);
   if (over_) return;
-  enqueue(line, std::move(work));
+  enqueue(line, OwnedWork::of(std::move(work)));
   if (urgency == Urgency::AtOnce && looking_) {
     ended_.notifyOne();
   }
@@ -95,10 +95,10 @@ void WorkerPool::addAfter(const std::shared_ptr<Line>& line, nanoseconds delay, 
   const MutexLock lock(mutex_);
   if (over_) return;
   if (delay <= nanoseconds::zero()) {
-    enqueue(line, std::move(work));
+    enqueue(line, OwnedWork::of(std::move(work)));
     return;
   }
-  delayed_.add(deadlineAfter(clock_.monotonic(), delay), Delayed(line, std::move(work)));
+  delayed_.add(deadlineAfter(clock_.monotonic(), delay), Delayed(line, OwnedWork::of(std::move(work))));
   watchNextMoment();
 }
 
@@ -107,7 +107,7 @@ void WorkerPool::suspend(const std::shared_ptr<Line>& line, nanoseconds longest,
   const auto moment = deadlineAfter(clock_.monotonic(), std::max(longest, nanoseconds::zero()));
   line->suspension = suspensions_.emplace(std::pair(moment, nextSuspension_++), line).first;
   line->interrupted = true;
-  line->next = std::move(next);
+  line->next = OwnedWork::of(std::move(next));
   countUnfinished();
   watchNextMoment();
 }
@@ -154,7 +154,7 @@ void WorkerPool::afterWhatIsUnfinished(platform::Work done) {
     }
     barrier->left += busy.size();
     for (const std::shared_ptr<Line>& line : busy) {
-      enqueue(line, [barrier] { barrier->pass(); });
+      enqueue(line, {[barrier] { barrier->pass(); }});
     }
   }
   barrier->pass();
@@ -171,7 +171,7 @@ bool WorkerPool::settle(nanoseconds longest) {
                           [this]() TARN_REQUIRES(mutex_) { return unfinished_ == 0; });
 }
 
-void WorkerPool::enqueue(const std::shared_ptr<Line>& line, platform::Work work) {
+void WorkerPool::enqueue(const std::shared_ptr<Line>& line, OwnedWork work) {
   line->incoming.push_back(std::move(work));
   line->waiting.fetch_add(1, std::memory_order_relaxed);
   countUnfinished();
@@ -220,7 +220,7 @@ void WorkerPool::takeDue() {
 bool WorkerPool::takeDuePieces(nanoseconds now) {
   try {
     while (delayed_.due(now)) {
-      std::vector<platform::Work>& incoming = delayed_.earliest().first->incoming;
+      std::vector<OwnedWork>& incoming = delayed_.earliest().first->incoming;
       if (incoming.size() == incoming.capacity()) {
         incoming.reserve(2 * incoming.size() + 1);
       }
@@ -311,7 +311,7 @@ void WorkerPool::runSome(Lines::iterator place) {
   running_.splice(running_.end(), runnable_, place);
   const std::shared_ptr<Line> line = *place;
   line->running = true;
-  platform::Work next = std::move(line->next);
+  OwnedWork next = std::move(line->next);
   if (line->position == line->taken.size()) {
     line->taken.clear();
     line->position = 0;
@@ -324,7 +324,7 @@ void WorkerPool::runSome(Lines::iterator place) {
   if (helpers_ > 0) {
     turnEnded_.notifyAll();
   }
-  const bool more = line->next || line->position < line->taken.size() || !line->incoming.empty();
+  const bool more = line->next.work || line->position < line->taken.size() || !line->incoming.empty();
   line->scheduled = more && !line->suspension;
   if (line->scheduled) {
     runnable_.splice(runnable_.end(), running_, place);
@@ -335,10 +335,10 @@ void WorkerPool::runSome(Lines::iterator place) {
   account(finished);
 }
 
-std::size_t WorkerPool::runTurn(Line& line, platform::Work next) {
+std::size_t WorkerPool::runTurn(Line& line, OwnedWork next) {
   const CurrentQueue current(&line);
   std::size_t finished = 0;
-  if (next) {
+  if (next.work) {
     runOne(line, std::move(next));
     ++finished;
   }
@@ -348,7 +348,7 @@ std::size_t WorkerPool::runTurn(Line& line, platform::Work next) {
   }
   line.interrupted = false;
   if (line.position == line.taken.size() && line.taken.capacity() > kKeptPieces) {
-    line.taken = std::vector<platform::Work>();
+    line.taken = std::vector<OwnedWork>();
     line.position = 0;
   }
   return finished;

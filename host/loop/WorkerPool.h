@@ -29,6 +29,7 @@
 #include <vector>
 
 #include "host/loop/DelayedWork.h"
+#include "host/loop/WorkOwner.h"
 #include "platform/Clock.h"
 #include "platform/WorkQueue.h"
 #include "plist/ThreadSafety.h"
@@ -69,7 +70,8 @@ class WorkerPool {
   // Gathered: while a thread is about to look again by itself, which is within half a millisecond, nobody is woken.
   // AtOnce: that look happens now.
   enum class Urgency { Gathered, AtOnce };
-  // Runs `work` as that of this line, after what the line was given before.
+  // Runs `work` as that of this line, after what the line was given before, for the session that the caller works for.
+  // So it is with all that is handed over.
   void add(const std::shared_ptr<Line>& line, platform::Work work, Urgency urgency = Urgency::Gathered);
   // Hands it over once `delay` has passed, not before; at once without one. It counts as unfinished from its moment on.
   void addAfter(const std::shared_ptr<Line>& line, std::chrono::nanoseconds delay, platform::Work work);
@@ -95,7 +97,7 @@ class WorkerPool {
   [[nodiscard]] bool settle(std::chrono::nanoseconds longest);
 
  private:
-  using Delayed = std::pair<std::shared_ptr<Line>, platform::Work>;
+  using Delayed = std::pair<std::shared_ptr<Line>, OwnedWork>;
   using Lines = std::list<std::shared_ptr<Line>>;
   // By deadline, equal ones in the order of the calls.
   using Suspensions = std::map<std::pair<std::chrono::nanoseconds, std::uint64_t>, std::shared_ptr<Line>>;
@@ -106,9 +108,9 @@ class WorkerPool {
   void destroyWhatIsLeft();
   // Without the lock: `next` and pieces that the line has taken, until it is suspended or had its handful. How many
   // ran.
-  static std::size_t runTurn(Line& line, platform::Work next);
+  static std::size_t runTurn(Line& line, OwnedWork next);
   // Puts work into the line and the line, unless it is there, is run or is suspended, at the end of the pool's.
-  void enqueue(const std::shared_ptr<Line>& line, platform::Work work) TARN_REQUIRES(mutex_);
+  void enqueue(const std::shared_ptr<Line>& line, OwnedWork work) TARN_REQUIRES(mutex_);
   void schedule(const std::shared_ptr<Line>& line) TARN_REQUIRES(mutex_);
   // The line may stand in the pool's line again; its `next` counts as waiting from here on.
   void endSuspension(Suspensions::iterator suspension) TARN_REQUIRES(mutex_);
@@ -160,13 +162,13 @@ class WorkerPool {
 struct WorkerPool::Line {
   // Under the pool's lock.
   Lines place{nullptr};  // what stands for it in the pool's lists; it is here while it is in none
-  std::vector<platform::Work> incoming;
-  platform::Work next;  // what runs first when a suspension is over
+  std::vector<OwnedWork> incoming;
+  OwnedWork next;  // what runs first when a suspension is over
   std::optional<Suspensions::iterator> suspension;
   bool scheduled = false;  // stands in the pool's line or is being run
   bool running = false;
   // Of the thread that runs the line.
-  std::vector<platform::Work> taken;
+  std::vector<OwnedWork> taken;
   std::size_t position = 0;
   bool interrupted = false;  // suspended by the piece that runs
   // Pieces handed over and not yet begun.

@@ -54,6 +54,9 @@ class SocketConnection final : public platform::Connection,
   ~SocketConnection() override;
 
   std::int32_t processIdentifier() const override { return client_.process; }
+  // As the log's lines have it.
+  std::int64_t number() const override { return static_cast<std::int64_t>(client_.connection); }
+  std::uint32_t userIdentifier() const override { return client_.user; }
   const LogClient& client() const noexcept { return client_; }
   // With number, process, user and executable of the client, as they were when it connected: the client may have become
   // another program since.

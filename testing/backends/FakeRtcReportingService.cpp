@@ -3,6 +3,8 @@
 #include <mutex>
 #include <utility>
 
+#include "testing/backends/RecordingSessionRecords.h"
+
 namespace tarn::testing {
 
 struct FakeRtcReportingService::Ledger {
@@ -42,7 +44,7 @@ class FakeRtcReportingService::FakeSession final : public platform::RtcReporting
     auto& session = ledger_->sessions[index_];
     ++session.attempts;
     if (ledger_->refusal) return *ledger_->refusal;
-    session.messages.push_back({category, type, payload});
+    session.messages.push_back({category, type, payload, RecordingSessionRecords::current()});
     return {true, {}};
   }
 

@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "platform/RtcReportingService.h"
+#include "platform/SessionRecords.h"
 #include "testing/backends/ReplyFaults.h"
 
 namespace tarn::testing {
@@ -22,6 +23,7 @@ class FakeRtcReportingService final : public platform::RtcReportingService {
     std::uint16_t category = 0;
     std::uint16_t type = 0;
     plist::Dictionary payload;
+    platform::SessionNumber session = 0;  // whose work it was to send it
   };
   struct Session {
     plist::Dictionary sessionInfo;

@@ -2,6 +2,8 @@
 
 #include <utility>
 
+#include "testing/backends/RecordingSessionRecords.h"
+
 namespace tarn::testing {
 
 bool FakeTallyService::eventIsInUse(std::string_view name) {
@@ -14,10 +16,10 @@ void FakeTallyService::sendEventLazy(std::string_view name, PayloadCallback payl
   if (!isInUse(name)) return;
   switch (calls_) {
     case PayloadCalls::AtOnce:
-      events_.push_back({std::string(name), payload()});
+      events_.push_back({std::string(name), payload(), RecordingSessionRecords::current()});
       break;
     case PayloadCalls::Later:
-      pending_.push_back({std::string(name), std::move(payload)});
+      pending_.push_back({std::string(name), std::move(payload), RecordingSessionRecords::current()});
       break;
     case PayloadCalls::Never:
       break;
@@ -37,7 +39,7 @@ std::size_t FakeTallyService::callPending() {
   while (!pending_.empty()) {
     Pending next = std::move(pending_.front());
     pending_.pop_front();
-    events_.push_back({std::move(next.name), next.payload()});
+    events_.push_back({std::move(next.name), next.payload(), next.session});
     ++called;
   }
   return called;

@@ -12,6 +12,7 @@
 #include <string_view>
 #include <vector>
 
+#include "platform/SessionRecords.h"
 #include "platform/TallyService.h"
 
 namespace tarn::testing {
@@ -26,6 +27,7 @@ class FakeTallyService final : public platform::TallyService {
   struct Event {
     std::string name;
     plist::Dictionary payload;
+    platform::SessionNumber session = 0;  // whose work it was to hand it over
   };
 
   // The interface.
@@ -53,6 +55,7 @@ class FakeTallyService final : public platform::TallyService {
   struct Pending {
     std::string name;
     PayloadCallback payload;
+    platform::SessionNumber session;
   };
 
   bool isInUse(std::string_view name) const { return !inUse_.has_value() || inUse_->contains(name); }

@@ -10,6 +10,7 @@
 #include "host/loop/LinuxWorkQueues.h"
 #include "testing/ManualClock.h"
 #include "testing/ManualWorkQueues.h"
+#include "testing/backends/RecordingSessionRecords.h"
 #include "tests/host/loop/SteadyClock.h"
 
 namespace tarn::recorder {
@@ -37,6 +38,18 @@ TEST_F(LateRepliesTest, ComeAfterTheCallInItsOrderOnOneQueue) {
   queues_.runUntilIdle();
   EXPECT_EQ(replies_, (std::vector<int>{1, 2}));
   EXPECT_EQ(queues_.names(), (std::vector<std::string>{"replies"}));
+}
+
+TEST_F(LateRepliesTest, AreWorkOfTheSessionThatAskedForThem) {
+  using tarn::testing::RecordingSessionRecords;
+  LateReplies late(queues_, {"replies", 1024, 20ms});
+  std::vector<platform::SessionNumber> owners;
+  for (const platform::SessionNumber session : {4, 9}) {
+    const RecordingSessionRecords::Scope scope(session);
+    EXPECT_TRUE(late.add([&owners] { owners.push_back(RecordingSessionRecords::current()); }));
+  }
+  queues_.advance(20ms);
+  EXPECT_EQ(owners, (std::vector<platform::SessionNumber>{4, 9}));
 }
 
 TEST_F(LateRepliesTest, EachComesByItsOwnDelay) {

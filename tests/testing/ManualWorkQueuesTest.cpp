@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "testing/ManualClock.h"
+#include "testing/backends/RecordingSessionRecords.h"
 
 namespace tarn::testing {
 namespace {
@@ -38,6 +39,28 @@ TEST_F(ManualWorkQueuesTest, NothingRunsUntilTold) {
   EXPECT_TRUE(ran_.empty());
   EXPECT_EQ(queues_.runUntilIdle(), 1U);
   EXPECT_EQ(ran_, std::vector<std::string>{"a"});
+}
+
+TEST_F(ManualWorkQueuesTest, APieceIsWorkOfTheSessionThatHandedItOverOnEveryRoad) {
+  std::vector<platform::SessionNumber> owners;
+  const auto ask = [&owners] { owners.push_back(RecordingSessionRecords::current()); };
+  const auto work = suspendable();
+  {
+    const RecordingSessionRecords::Scope session(3);
+    work->async(ask);
+    work->asyncAfter(1s, ask);
+    work->async([&work, &ask] { work->suspend(5s, ask); });
+  }
+  work->async(ask);
+  queues_.advance(0s);
+  EXPECT_EQ(owners, std::vector<platform::SessionNumber>{3});
+  {
+    const RecordingSessionRecords::Scope session(4);
+    work->resume();
+    queues_.advance(1s);
+  }
+  EXPECT_EQ(owners, (std::vector<platform::SessionNumber>{3, 3, 0, 3}));
+  EXPECT_EQ(RecordingSessionRecords::current(), 0);
 }
 
 TEST_F(ManualWorkQueuesTest, AllQueuesRunInTheOrderOfTheHandOver) {

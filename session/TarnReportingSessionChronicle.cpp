@@ -1,0 +1,52 @@
+#include "session/TarnReportingSessionChronicle.h"
+
+#include <new>
+#include <utility>
+
+namespace tarn {
+
+namespace {
+
+// What can't be put off: it is left untold without the memory for it.
+template <class Tell>
+void tellIfPossible(Tell&& tell) noexcept {
+  try {
+    tell();
+  } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): the keeper of the records counts it
+  }
+}
+
+}  // namespace
+
+TarnReportingSessionChronicle::TarnReportingSessionChronicle(platform::SessionRecords* records,
+                                                             platform::SessionFacts facts)
+    : records_(records), number_(records == nullptr ? 0 : records->created(facts)), facts_(std::move(facts)) {}
+
+void TarnReportingSessionChronicle::describe(platform::SessionFacts facts) {
+  if (records_ == nullptr || facts == facts_) return;
+  records_->described(number_, facts);
+  facts_ = std::move(facts);
+}
+
+void TarnReportingSessionChronicle::start() {
+  if (records_ == nullptr || state_ == State::Running || state_ == State::Ended) return;
+  records_->started(number_);
+  state_ = State::Running;
+  messages_ = 0;
+  redundant_ = 0;
+}
+
+void TarnReportingSessionChronicle::stop() noexcept {
+  if (state_ != State::Running) return;
+  state_ = State::Stopped;
+  tellIfPossible([this] { records_->stopped(number_, messages_, redundant_); });
+}
+
+void TarnReportingSessionChronicle::end(platform::SessionEnd end) noexcept {
+  if (records_ == nullptr || state_ == State::Ended) return;
+  stop();
+  state_ = State::Ended;
+  tellIfPossible([this, end] { records_->ended(number_, end); });
+}
+
+}  // namespace tarn
