@@ -264,6 +264,7 @@ void LinuxPlatform::serve() {
   loop_.run();
   endDeadline_.cancel();
   tryTo([this] { loop_.queue()->run(std::numeric_limits<std::size_t>::max()); });
+  connections_.gathersReplies = false;
   connections_.shares.finishWork();  // requests that were taken are served
   loop_.flushAll();
   end();

@@ -142,13 +142,15 @@ class SocketConnection final : public platform::Connection,
 
   // Sends the reply, or counts it as dropped when nobody can get it any more.
   template <class Content>
-  void reply(std::uint64_t id, const Content& content) noexcept;
+  void reply(std::uint64_t id, Content& content) noexcept;
   // In the place of a reply that is too large for the memory that there is.
   void replyShortly(std::uint64_t id) noexcept;
   // With the turn's end, or at once when much waits.
   void flushSoon() noexcept;
   // In pieces, ahead of the connection's next request.
   void sendRest(NumbersReply numbers) noexcept;
+  // Bytes that the next flush sends.
+  std::size_t sentAtOnce() const noexcept;
   // Whether the replies had better go out with those of the next turns.
   bool gathersReplies();
 
