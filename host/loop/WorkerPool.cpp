@@ -7,6 +7,7 @@
 
 #include "host/loop/CurrentQueue.h"
 #include "host/system/MemoryReserve.h"
+#include "host/system/ThreadRank.h"
 
 namespace tarn::linux_host {
 
@@ -279,6 +280,7 @@ void WorkerPool::watchNextMoment() {
 }
 
 void WorkerPool::serve() {
+  standBack();  // what it works off comes from the server queue, which others wait for
   const MutexLock lock(mutex_);
   bool worked = false;
   for (;;) {
