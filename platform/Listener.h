@@ -23,6 +23,8 @@ class Connection {
   // The peer's process ID, as the kernel saw it when the peer connected; 0 when it lies outside of our process
   // namespace. By now another process may have it.
   virtual std::int32_t processIdentifier() const = 0;
+  // The user for whom the peer runs (its uid), likewise.
+  virtual std::uint32_t user() const noexcept = 0;
   // A short text for the log: which peer this is. UTF-8, without a line end.
   virtual std::string description() const = 0;
   // The object that serves the peer's requests, held until the connection is over. Set before resume().

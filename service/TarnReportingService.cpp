@@ -112,7 +112,7 @@ bool TarnReportingService::listenerShouldAcceptNewConnection(const std::shared_p
   std::shared_ptr<TarnReportingClientServerInstance> client;
   {
     const MutexLock lock(mutex_);
-    client = TarnReportingClientServerInstance::initWithPID(processIdentifier, weak_from_this());
+    client = TarnReportingClientServerInstance::initWithPID(processIdentifier, weak_from_this(), connection->user());
     connection->setExportedObject(client);
   }
   TarnReportingUtilityGetReportingServerQueue()->async([self = shared_from_this(), client, processIdentifier] {

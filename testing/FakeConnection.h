@@ -13,12 +13,14 @@ namespace tarn::testing {
 
 class FakeConnection final : public platform::Connection, public std::enable_shared_from_this<FakeConnection> {
  public:
-  explicit FakeConnection(std::int32_t processIdentifier) : processIdentifier_(processIdentifier) {}
+  explicit FakeConnection(std::int32_t processIdentifier, std::uint32_t user = 0)
+      : processIdentifier_(processIdentifier), user_(user) {}
   FakeConnection(const FakeConnection&) = delete;
   FakeConnection& operator=(const FakeConnection&) = delete;
 
   // The interface.
   std::int32_t processIdentifier() const override { return processIdentifier_; }
+  std::uint32_t user() const noexcept override { return user_; }
   std::string description() const override;
   void setExportedObject(std::shared_ptr<platform::TarnReportingServiceProtocol> object) override;
   void setInterruptionHandler(Handler handler) override;
@@ -46,6 +48,7 @@ class FakeConnection final : public platform::Connection, public std::enable_sha
 
  private:
   const std::int32_t processIdentifier_;
+  const std::uint32_t user_;
   std::shared_ptr<platform::TarnReportingServiceProtocol> exportedObject_;
   Handler interruptionHandler_;
   Handler invalidationHandler_;

@@ -54,6 +54,7 @@ class SocketConnection final : public platform::Connection,
   ~SocketConnection() override;
 
   std::int32_t processIdentifier() const override { return client_.process; }
+  std::uint32_t user() const noexcept override { return party().user; }
   const LogClient& client() const noexcept { return client_; }
   // With number, process, user and executable of the client, as they were when it connected: the client may have become
   // another program since.
@@ -69,7 +70,6 @@ class SocketConnection final : public platform::Connection,
   // For a user that has as many connections as it may: instead of setting it up and resuming it. It answers every
   // request but `status` with this text (error 4) until the client ends it, so that a client learns why.
   void refuse(std::string why);
-  std::uint32_t user() const noexcept { return party().user; }
 
   // The socket became ready: asks for a turn, or while requests aren't taken looks only for a `status` at the head.
   void handleEvents(std::uint32_t events) override;
