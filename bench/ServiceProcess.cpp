@@ -50,7 +50,7 @@ void ServiceProcess::writeConfiguration(const ServiceSetup& setup) const {
        << "[recorder]\nmax_megabytes = " << setup.maxMegabytes << '\n'
        << "[limits]\n";
   for (const char* const bound :
-       {"log_bytes_per_session", "log_bytes", "log_bytes_per_connection", "log_bytes_per_user"}) {
+       {"log_bytes_per_session", "log_bytes", "log_share_per_user", "log_bytes_per_connection", "log_bytes_per_user"}) {
     file << bound << " = " << kLogBytes << '\n';
   }
 }

@@ -27,6 +27,9 @@ constexpr std::chrono::seconds kLongestFlush{10};
 // A shortage is told once in this time.
 constexpr std::chrono::seconds kBetweenTellings{1};
 
+// So many pieces may wait for the pool's threads at any rate.
+constexpr std::size_t kFewPieces = 256;
+
 // For what is done also when memory is missing for one part of it.
 template <class Work>
 void tryTo(Work&& work) {
@@ -123,7 +126,10 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
     return CommitPoint{counters.handedOver, counters.committed, workQueues_.unfinished() == 0};
   });
   connections_.gate.setPauseSource([this] { return recorder_.isFull() || workQueues_.isFull(); });
-  connections_.gate.setCrowdSource([this] { return recorder_.isCrowded(); });
+  // Most of what waits for the pool's threads becomes events, so it counts as if it waited for the recorder already.
+  connections_.gate.setCrowdSource([this] {
+    return recorder_.isCrowded() || workQueues_.isCrowded(std::max(recorder_.roomUntilCrowded(), kFewPieces));
+  });
   loop_.addTurnHook([this] { lookForTheEnd(); });
   loop_.addTurnHook([this] { tellLosses(); });
   if (recorderEnabled_) {
@@ -264,6 +270,7 @@ void LinuxPlatform::serve() {
   loop_.run();
   endDeadline_.cancel();
   tryTo([this] { loop_.queue()->run(std::numeric_limits<std::size_t>::max()); });
+  connections_.gathersReplies = false;
   connections_.shares.finishWork();  // requests that were taken are served
   loop_.flushAll();
   end();

@@ -25,8 +25,8 @@ class Connection {
   virtual std::int32_t processIdentifier() const = 0;
   // By which the platform tells its connections apart, from 1; no number is given twice.
   virtual std::int64_t number() const = 0;
-  // The peer's user, as the kernel saw it likewise; its greatest value when that isn't known.
-  virtual std::uint32_t userIdentifier() const = 0;
+  // The user for whom the peer runs (its uid), likewise.
+  virtual std::uint32_t user() const noexcept = 0;
   // A short text for the log: which peer this is. UTF-8, without a line end.
   virtual std::string description() const = 0;
   // The object that serves the peer's requests, held until the connection is over. Set before resume().

@@ -26,6 +26,8 @@ class OverflowStore {
     std::size_t bytesOfSession = std::numeric_limits<std::size_t>::max();
     // Of all logs; the largest one gives way.
     std::size_t bytesInAll = std::numeric_limits<std::size_t>::max();
+    // Of all logs of one user's sessions; the user's largest one gives way.
+    std::size_t bytesOfUser = std::numeric_limits<std::size_t>::max();
 
     bool operator==(const Bounds&) const = default;
   };

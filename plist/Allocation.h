@@ -18,4 +18,9 @@ inline void* allocate(std::size_t bytes, void* block = nullptr) {
   }
 }
 
+// Owns such a block.
+struct Release {
+  void operator()(void* block) const noexcept { std::free(block); }
+};
+
 }  // namespace tarn::plist::detail

@@ -11,6 +11,11 @@ namespace {
 
 using SteadyClock = std::chrono::steady_clock;
 
+// From so many of `most` on it is crowded.
+std::size_t crowdOf(std::size_t most) {
+  return most * 3 / 4;
+}
+
 }  // namespace
 
 Recorder::Recorder(RecorderOptions options, platform::Log& log, const platform::Clock& clock)
@@ -19,6 +24,7 @@ Recorder::Recorder(RecorderOptions options, platform::Log& log, const platform::
       log_(log),
       writer_(options_, log, clock),
       retry_(options_.firstRetry),
+      room_(crowdOf(options_.highWaterEvents)),
       most_(options_.highWaterEvents) {}
 
 Recorder::~Recorder() {
@@ -98,12 +104,19 @@ void Recorder::record(std::string_view backend, std::string_view name, plist::Di
 }
 
 void Recorder::noteUse() noexcept {
+  noteRoom();
   const std::uint64_t waiting = handedOver_ - committed_ - failed_;
-  if (waiting < most_ * 3 / 4 && waitingBytes_ < options_.highWaterBytes * 3 / 4) return;
+  if (waiting < crowdOf(most_) && waitingBytes_ < crowdOf(options_.highWaterBytes)) return;
   crowded_.store(true, std::memory_order_relaxed);
   if (waiting >= most_ || waitingBytes_ >= options_.highWaterBytes) {
     full_.store(true, std::memory_order_relaxed);
   }
+}
+
+void Recorder::noteRoom() noexcept {
+  const std::uint64_t waiting = handedOver_ - committed_ - failed_;
+  const std::size_t crowd = crowdOf(most_);
+  room_.store(waiting < crowd ? crowd - waiting : 0, std::memory_order_relaxed);
 }
 
 RecorderCounters Recorder::counters() const {

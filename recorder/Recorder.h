@@ -91,6 +91,8 @@ class Recorder {
   // Whether it will soon be full, if those that bring in most go on: from three quarters of the high marks on. Threads:
   // any.
   bool isCrowded() const noexcept { return crowded_.load(std::memory_order_relaxed); }
+  // How many more events may come until it is. A load. Threads: any.
+  std::size_t roomUntilCrowded() const noexcept { return room_.load(std::memory_order_relaxed); }
   // All counters of one moment. Threads: any.
   RecorderCounters counters() const;
   // Commits what was handed over before the call without waiting for company, blocking for at most `timeout`. Whether
@@ -139,6 +141,8 @@ class Recorder {
   bool verify() TARN_REQUIRES(mutex_);
   // Sets what isFull() and isCrowded() tell, after an event came.
   void noteUse() noexcept TARN_REQUIRES(mutex_);
+  // Sets what roomUntilCrowded() tells, after any change of what waits or of how much may.
+  void noteRoom() noexcept TARN_REQUIRES(mutex_);
   // Since when the oldest event waits, after some were committed.
   void noteOldest() TARN_REQUIRES(mutex_);
   void notePace() TARN_REQUIRES(mutex_);
@@ -179,6 +183,7 @@ class Recorder {
   // What isFull() and isCrowded() look at without the lock; written under it.
   std::atomic<bool> full_{false};
   std::atomic<bool> crowded_{false};
+  std::atomic<std::size_t> room_;
   // Of the oldest event that waits, in the steady clock's ticks; 0 when none does.
   std::atomic<TimePoint::rep> oldestSince_{0};
   mutable Mutex mutex_;

@@ -235,6 +235,7 @@ void Recorder::account(std::size_t events, std::size_t bytes) {
     lastId_ = writer_.lastId();
     noteOldest();
     notePace();
+    noteRoom();
     if (!countsOpen_ || counts_.isTorn()) {
       mutex_.unlock();
       try {

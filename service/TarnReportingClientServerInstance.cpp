@@ -10,6 +10,7 @@
 #include "service/TarnReportingMessageDelivery.h"
 #include "service/TarnReportingSessionListing.h"
 #include "service/TarnReportingSlices.h"
+#include "service/vocabulary/ProcessState.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
 #include "service/vocabulary/TarnReportingServerQueue.h"
@@ -63,17 +64,17 @@ void sendHeldReply(TarnReportingSession& session) {
 }  // namespace
 
 std::shared_ptr<TarnReportingClientServerInstance> TarnReportingClientServerInstance::initWithPID(
-    std::int32_t processIdentifier, std::weak_ptr<TarnReportingServiceDelegateProtocol> delegate) {
+    std::int32_t processIdentifier, std::weak_ptr<TarnReportingServiceDelegateProtocol> delegate, std::uint32_t user) {
   struct Constructible : TarnReportingClientServerInstance {
-    Constructible(std::int32_t pid, std::weak_ptr<TarnReportingServiceDelegateProtocol> service)
-        : TarnReportingClientServerInstance(pid, std::move(service)) {}
+    Constructible(std::int32_t pid, std::weak_ptr<TarnReportingServiceDelegateProtocol> service, std::uint32_t theUser)
+        : TarnReportingClientServerInstance(pid, std::move(service), theUser) {}
   };
-  return std::make_shared<Constructible>(processIdentifier, std::move(delegate));
+  return std::make_shared<Constructible>(processIdentifier, std::move(delegate), user);
 }
 
 TarnReportingClientServerInstance::TarnReportingClientServerInstance(
-    std::int32_t processIdentifier, std::weak_ptr<TarnReportingServiceDelegateProtocol> delegate)
-    : processIdentifier_(processIdentifier), delegate_(std::move(delegate)) {
+    std::int32_t processIdentifier, std::weak_ptr<TarnReportingServiceDelegateProtocol> delegate, std::uint32_t user)
+    : processIdentifier_(processIdentifier), user_(user), delegate_(std::move(delegate)) {
   kLog(LogLevel::Debug, "new client with pid %lu", processIdentifier_);
 }
 
@@ -212,6 +213,9 @@ std::shared_ptr<TarnReportingSession> TarnReportingClientServerInstance::makeSes
   auto session = TarnReportingSession::initWithID(
       reporterID, {processIdentifier_}, TarnReportingSession::Mode::Ordinary, {connection_, user_, clientProcessName_});
   session->setClientProcessName(clientProcessName_);
+  if (!logAccount_) {
+    logAccount_ = ProcessState::of<TarnReportingSessionLogMemory>()->makeAccount(user_);
+  }
   session->setLogAccount(logAccount_);
   return session;
 }

@@ -31,11 +31,12 @@ class TarnReportingSessionIndex;
 class TarnReportingClientServerInstance : public platform::TarnReportingServiceProtocol,
                                           public std::enable_shared_from_this<TarnReportingClientServerInstance> {
  public:
-  // Makes the instance of the process with this ID, with no session; logs the ID at debug level. The instance is made
-  // on whatever thread accepts connections, so it does no work on the server queue's state here. The service gives it
-  // its start date, its name and its place in the index with a piece of work on the queue.
+  // Makes the instance of the process with this ID, which `user` runs, with no session; logs the ID at debug level. The
+  // instance is made on whatever thread accepts connections, so it does no work on the server queue's state here. The
+  // service gives it its start date, its name and its place in the index with a piece of work on the queue.
   static std::shared_ptr<TarnReportingClientServerInstance> initWithPID(
-      std::int32_t processIdentifier, std::weak_ptr<TarnReportingServiceDelegateProtocol> delegate);
+      std::int32_t processIdentifier, std::weak_ptr<TarnReportingServiceDelegateProtocol> delegate,
+      std::uint32_t user = 0);
   TarnReportingClientServerInstance(const TarnReportingClientServerInstance&) = delete;
   TarnReportingClientServerInstance& operator=(const TarnReportingClientServerInstance&) = delete;
   // Logs a line with the client's process; its sessions go with the map, in order.
@@ -88,7 +89,7 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
   // estimated memory of the logged messages of all of this client's sessions, those included that were replaced while
   // somebody still holds them.
   std::size_t sessionCount() const override { return sessions_.size(); }
-  std::size_t logBytes() const override { return logAccount_->bytes; }
+  std::size_t logBytes() const override { return logAccount_ ? logAccount_->bytes : 0; }
   // Whether a further create under this ID would replace a session, and so needs no room for one more.
   bool hasSession(std::int64_t reporterID) const override { return sessions_.find(reporterID) != nullptr; }
 
@@ -106,11 +107,8 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
 
   // The process at the other end, as the connection told it when it was accepted.
   std::int32_t processIdentifier() const noexcept { return processIdentifier_; }
-  // Which connection it is and whose, for the session records; set by the service before anything is asked of it.
-  void setConnection(std::int64_t number, std::uint32_t user) noexcept {
-    connection_ = number;
-    user_ = user;
-  }
+  // Which connection it is, for the session records; set by the service before anything is asked of it.
+  void setConnection(std::int64_t number) noexcept { connection_ = number; }
   // For who lists or counts sessions; only the instance changes the map.
   const TarnReportingSessionMap& clientReportingSessionMap() const noexcept { return sessions_; }
   // When the connection was accepted, in epoch seconds; set by the service.
@@ -124,7 +122,7 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
 
  private:
   TarnReportingClientServerInstance(std::int32_t processIdentifier,
-                                    std::weak_ptr<TarnReportingServiceDelegateProtocol> delegate);
+                                    std::weak_ptr<TarnReportingServiceDelegateProtocol> delegate, std::uint32_t user);
   // A session with this client's process, name and account of memory; nothing finds it until it is stored.
   std::shared_ptr<TarnReportingSession> makeSession(std::int64_t reporterID);
   // Stops the session and charges what that costs. A stop sorts and hands over the log, so half a unit per logged
@@ -144,8 +142,8 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
   void endClient();
 
   const std::int32_t processIdentifier_;
-  std::int64_t connection_ = 0;  // 0 and 0 while nobody said
-  std::uint32_t user_ = 0;
+  std::int64_t connection_ = 0;  // 0 while nobody said
+  const std::uint32_t user_;
   const std::weak_ptr<TarnReportingServiceDelegateProtocol> delegate_;
 
   // Server queue only. Nothing until the service's own work has listed the client; only the uptime in the client's last
@@ -154,8 +152,8 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
   std::string clientProcessName_;
   TarnReportingSessionMap sessions_;
   // Shared with the sessions, which book what their logs take; it outlives a session that somebody else still holds.
-  const std::shared_ptr<TarnReportingSessionLogAccount> logAccount_ =
-      std::make_shared<TarnReportingSessionLogAccount>();
+  // Made with the first of them.
+  std::shared_ptr<TarnReportingSessionLogAccount> logAccount_;
   // endClient() runs again for each slice, and the line with the reason of the end is written once.
   bool endTold_ = false;
 };

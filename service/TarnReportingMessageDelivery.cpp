@@ -18,7 +18,7 @@ constexpr std::string_view kErrorDomain = "sys.oxbow.audio.reporting";
 constexpr std::int64_t kReportingDisabled = 1;
 constexpr std::uint32_t kTraceSend = 0x21044824;
 // Of handing a message to a session, in units of about a microsecond.
-constexpr std::size_t kDeliveryCost = 2;
+constexpr std::size_t kDeliveryCost = 4;
 
 plist::ValueView textOf(const platform::ReporterIDs& reporterIDs, plist::Array& storage) {
   if (!reporterIDs) return {};

@@ -6,7 +6,7 @@
 // Who gets it is settled by the end of the look-up: the sessions under the IDs, or whoever runs then. A broadcast
 // leaves out those that were stopped before their turn in it; a session that was named gets the message though it was
 // stopped meanwhile. Each session gets a record of its own; the payload is shared until somebody writes to it, and the
-// last session takes the delivery's own. Handing over costs two units a session, and looking up a sixteenth of one an
+// last session takes the delivery's own. Handing over costs four units a session, and looking up a sixteenth of one an
 // ID.
 #pragma once
 

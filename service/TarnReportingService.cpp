@@ -112,8 +112,8 @@ bool TarnReportingService::listenerShouldAcceptNewConnection(const std::shared_p
   std::shared_ptr<TarnReportingClientServerInstance> client;
   {
     const MutexLock lock(mutex_);
-    client = TarnReportingClientServerInstance::initWithPID(processIdentifier, weak_from_this());
-    client->setConnection(connection->number(), connection->userIdentifier());
+    client = TarnReportingClientServerInstance::initWithPID(processIdentifier, weak_from_this(), connection->user());
+    client->setConnection(connection->number());
     connection->setExportedObject(client);
   }
   TarnReportingUtilityGetReportingServerQueue()->async([self = shared_from_this(), client, processIdentifier] {

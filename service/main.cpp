@@ -20,6 +20,7 @@
 #include "host/loop/SignalSource.h"
 #include "host/settings/HostPaths.h"
 #include "host/settings/ServiceOptions.h"
+#include "host/system/Heap.h"
 #include "service/TarnReportingService.h"
 #include "service/TarnReportingWorkerClasses.h"
 #include "service/vocabulary/ProcessState.h"
@@ -116,6 +117,7 @@ int serve(LinuxPlatform& platform, HostSetup& setup) {
 
 // The exit status.
 int run(int argumentCount, char** arguments) {
+  shapeHeap();
   const ServiceCommand command = parseServiceCommand(argumentCount, arguments, HostEnvironment::current());
   std::cout << command.output << std::flush;
   if (command.usage.failed()) return refuse(command.usage->text, command.usage->code);

@@ -23,13 +23,35 @@ constexpr std::size_t kRetryBytes = std::size_t{1} << 20U;
 constexpr std::size_t kRecordBytes = 64;
 constexpr std::size_t kBlockBytes = 16;
 constexpr std::size_t kKeyBytes = 56;
+// So many users are remembered before those that are gone are looked for.
+constexpr std::size_t kKeptUsers = 64;
 
 }  // namespace
 
 TarnReportingSessionLogMemory::TarnReportingSessionLogMemory()
     : store_(TarnReportingFacilities().overflow),
       bounds_(store_ != nullptr ? store_->bounds() : platform::OverflowStore::Bounds{}),
-      chunkBytes_(std::min(kLargestChunk, bounds_.bytesOfSession / kChunksOfBound)) {}
+      chunkBytes_(std::min(kLargestChunk, bounds_.bytesOfSession / kChunksOfBound)),
+      nobodys_(std::make_unique<Share>()) {}
+
+TarnReportingSessionLogMemory::~TarnReportingSessionLogMemory() = default;
+
+std::shared_ptr<TarnReportingSessionLogAccount> TarnReportingSessionLogMemory::makeAccount(std::uint32_t user) {
+  if (shares_.size() > kKeptUsers) {
+    std::erase_if(shares_, [](const auto& entry) { return entry.second.expired(); });
+  }
+  std::weak_ptr<Share>& known = shares_[user];
+  std::shared_ptr<Share> share = known.lock();
+  if (share == nullptr) {
+    share = std::make_shared<Share>();
+    known = share;
+  }
+  return std::make_shared<TarnReportingSessionLogAccount>(TarnReportingSessionLogAccount{0, std::move(share)});
+}
+
+TarnReportingSessionLogMemory::Share& TarnReportingSessionLogMemory::shareOf(const List& list) noexcept {
+  return list.account_ && list.account_->share ? *list.account_->share : *nobodys_;
+}
 
 TarnReportingSessionLogMemory::Usage TarnReportingSessionLogMemory::usage() const noexcept {
   return {bytesInMemory(), pageCounts_->bytesInStore, overflowing_, failures_, pageCounts_->recordsLost};
@@ -52,6 +74,7 @@ std::size_t TarnReportingSessionLogMemory::costOf(const TarnReportingSessionMess
 void TarnReportingSessionLogMemory::add(List& list, std::size_t bytes) {
   bytes_ += bytes;
   list.bytes_ += bytes;
+  shareOf(list).bytes += bytes;
   if (list.account_) {
     list.account_->bytes += bytes;
   }
@@ -61,6 +84,7 @@ void TarnReportingSessionLogMemory::add(List& list, std::size_t bytes) {
 void TarnReportingSessionLogMemory::subtract(List& list, std::size_t bytes) noexcept {
   bytes_ -= bytes;
   list.bytes_ -= bytes;
+  shareOf(list).bytes -= bytes;
   if (list.account_) {
     list.account_->bytes -= bytes;
   }
@@ -74,6 +98,9 @@ void TarnReportingSessionLogMemory::relieve(List& list) {
   try {
     while (list.bytes_ > bounds_.bytesOfSession && mayTry() && list.moveOldest()) {
     }
+    Share& share = shareOf(list);
+    while (&share != nobodys_.get() && share.bytes > bounds_.bytesOfUser && relieveLargest(share)) {
+    }
     while (bytesInMemory() > bounds_.bytesInAll && relieveLargest()) {
     }
   } catch (const std::bad_alloc&) {
@@ -82,13 +109,28 @@ void TarnReportingSessionLogMemory::relieve(List& list) {
 }
 
 // Lists in the way that can't give anything now are those that are gone through.
-bool TarnReportingSessionLogMemory::relieveLargest() {
-  for (auto row = rows_.rbegin(); row != rows_.rend(); ++row) {
+bool TarnReportingSessionLogMemory::relieveLargest(Share& share) {
+  for (auto row = share.rows.rbegin(); row != share.rows.rend(); ++row) {
     for (List* list = *row; list != nullptr && mayTry(); list = list->link_.next) {
       if (list->moveOldest()) return true;
     }
   }
   return false;
+}
+
+// Who has most may have nothing that can be moved.
+bool TarnReportingSessionLogMemory::relieveLargest() {
+  Share* largest = nobodys_.get();
+  for (const auto& [user, known] : shares_) {
+    if (const auto share = known.lock(); share && share->bytes > largest->bytes) {
+      largest = share.get();
+    }
+  }
+  return relieveLargest(*largest) || relieveLargest(*nobodys_) ||
+         std::any_of(shares_.begin(), shares_.end(), [this](const auto& entry) {
+           const auto share = entry.second.lock();
+           return share && relieveLargest(*share);
+         });
 }
 
 void TarnReportingSessionLogMemory::toldFailure(const Error& error) {
@@ -104,10 +146,23 @@ void TarnReportingSessionLogMemory::toldSuccess() {
   }
 }
 
-void TarnReportingSessionLogMemory::place(List& list) noexcept {
-  Link& link = list.link_;
+void TarnReportingSessionLogMemory::leave(List& list) noexcept {
+  shareOf(list).bytes -= list.bytes_;
+  placeIn(list, nullptr);
+}
+
+void TarnReportingSessionLogMemory::enter(List& list) noexcept {
+  shareOf(list).bytes += list.bytes_;
+  place(list);
+}
+
+TarnReportingSessionLogMemory::List** TarnReportingSessionLogMemory::rowOf(const List& list) noexcept {
   const bool isEmpty = list.size() == list.overflowed();
-  List** const row = isEmpty ? nullptr : &rows_[static_cast<std::size_t>(std::bit_width(list.bytes_))];
+  return isEmpty ? nullptr : &shareOf(list).rows[static_cast<std::size_t>(std::bit_width(list.bytes_))];
+}
+
+void TarnReportingSessionLogMemory::placeIn(List& list, List** row) noexcept {
+  Link& link = list.link_;
   if (row != link.row) {
     if (link.row != nullptr) {
       point(link.at, link.next);

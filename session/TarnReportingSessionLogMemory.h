@@ -6,6 +6,10 @@
 // their size, so that finding it costs the same with one list and with a hundred thousand. It frees most at once, and
 // it is the one whose client made the others pay.
 //
+// The lists of one user's sessions have a bound of their own, and rows of their own: it is the user's largest list that
+// gives way then, and when all together are too large, it is that of the user who has most. So nobody's memory is taken
+// by who opens many sessions.
+//
 // A store that can't take anything (none is there, its disk is full) loses nothing: messages stay in memory, one line
 // tells so, and it is tried again after every further mebibyte.
 //
@@ -18,6 +22,7 @@
 #include <limits>
 #include <memory>
 #include <optional>
+#include <unordered_map>
 
 #include "platform/OverflowStore.h"
 #include "plist/Dictionary.h"
@@ -26,11 +31,14 @@
 namespace tarn {
 
 class TarnReportingSessionMessageList;
+struct TarnReportingSessionLogShare;
 
 // The memory that the logs of one owner's sessions take. Bytes as costOf() estimates them. The owner reads it to hold a
 // client to its quota.
 struct TarnReportingSessionLogAccount {
   std::size_t bytes = 0;
+  // Of the user whose client the owner is; null: of those that are nobody's.
+  std::shared_ptr<TarnReportingSessionLogShare> share{};
 };
 
 class TarnReportingSessionLogMemory {
@@ -48,16 +56,21 @@ class TarnReportingSessionLogMemory {
 
   // Takes the store and its bounds from the facilities; without a store nothing is ever moved.
   TarnReportingSessionLogMemory();
+  ~TarnReportingSessionLogMemory();
   TarnReportingSessionLogMemory(const TarnReportingSessionLogMemory&) = delete;
   TarnReportingSessionLogMemory& operator=(const TarnReportingSessionLogMemory&) = delete;
 
   // At this moment; failures and losses since the process began.
   Usage usage() const noexcept;
+  // An account for lists of this user's sessions. Users are remembered while they have one.
+  std::shared_ptr<TarnReportingSessionLogAccount> makeAccount(std::uint32_t user);
 
  private:
   friend class TarnReportingSessionMessageList;
   using List = TarnReportingSessionMessageList;
   using Page = TarnReportingSessionMessagePage;
+  using Share = TarnReportingSessionLogShare;
+  friend struct TarnReportingSessionLogShare;
 
   // A place in a row of lists of about the same size.
   struct Link {
@@ -79,8 +92,11 @@ class TarnReportingSessionLogMemory {
   void subtract(List& list, std::size_t bytes) noexcept;
   // Moves messages to the store until both bounds are kept again, or it takes no more.
   void relieve(List& list);
-  // Moves a chunk of the largest list that can give one; false when none can or the store failed.
+  // Moves a chunk of the largest list that can give one, of a user or of whoever has most; false when none can or the
+  // store failed.
+  bool relieveLargest(Share& share);
   bool relieveLargest();
+  Share& shareOf(const List& list) noexcept;
   // Pages count that the store had no room for.
   std::size_t bytesInMemory() const noexcept { return bytes_ + pageCounts_->bytesInMemory; }
   // After a failure not before memory has grown by a further mebibyte, or a full disk would be asked for every message.
@@ -90,7 +106,12 @@ class TarnReportingSessionLogMemory {
   // From then on it is tried again whenever a bound is exceeded.
   void toldSuccess();
   // Puts the list into the row of its size; an empty one into none.
-  void place(List& list) noexcept;
+  void place(List& list) noexcept { placeIn(list, rowOf(list)); }
+  // For a list whose account changes: out of what its user has, and into what the new one has.
+  void leave(List& list) noexcept;
+  void enter(List& list) noexcept;
+  List** rowOf(const List& list) noexcept;
+  static void placeIn(List& list, List** row) noexcept;
   static void point(List** at, List* list) noexcept;
 
   platform::OverflowStore* const store_;
@@ -104,10 +125,17 @@ class TarnReportingSessionLogMemory {
   // The last attempt failed; the memory in bytes at which the next one is made.
   std::optional<std::size_t> retryAt_;
   const std::shared_ptr<Page::Counts> pageCounts_ = std::make_shared<Page::Counts>();
-  // The first list of each row; lists link themselves.
-  std::array<List*, kRows> rows_{};
+  std::unordered_map<std::uint32_t, std::weak_ptr<Share>> shares_;
   // Key lists are shared by all messages of a shape: who brings one that wasn't seen lately pays for it.
   std::array<std::uint64_t, kKnownShapes> knownShapes_{};
+  const std::unique_ptr<Share> nobodys_;
+};
+
+// What the lists of one user's sessions take, and where they stand. Lives as long as an account of the user.
+struct TarnReportingSessionLogShare {
+  std::size_t bytes = 0;
+  // The first list of each row; lists link themselves.
+  std::array<TarnReportingSessionMessageList*, TarnReportingSessionLogMemory::kRows> rows{};
 };
 
 }  // namespace tarn

@@ -50,12 +50,18 @@ void TarnReportingSessionMessageList::takeFrom(TarnReportingSessionMessageList& 
 }
 
 void TarnReportingSessionMessageList::setAccount(std::shared_ptr<TarnReportingSessionLogAccount> account) {
+  if (memory_) {
+    memory_->leave(*this);
+  }
   if (account_) {
     account_->bytes -= bytes_;
   }
   account_ = std::move(account);
   if (account_) {
     account_->bytes += bytes_;
+  }
+  if (memory_) {
+    memory_->enter(*this);
   }
 }
 

@@ -2,85 +2,102 @@
 
 namespace tarn {
 
+void TarnReportingSessionMessageLog::setAccount(std::shared_ptr<TarnReportingSessionLogAccount> account) {
+  account_ = std::move(account);
+  if (body_) {
+    body_->messages.setAccount(account_);
+  }
+}
+
+const TarnReportingSessionMessageList& TarnReportingSessionMessageLog::messages() const noexcept {
+  static const TarnReportingSessionMessageList kEmpty;
+  return body_ ? body_->messages : kEmpty;
+}
+
 void TarnReportingSessionMessageLog::append(Record record) {
+  if (!body_) {
+    body_ = std::make_unique<Body>(reporterID_);
+    body_->messages.setAccount(account_);
+  }
   // The place first: what points to the record must not outlive one that found no room.
-  const auto [place, isNew] = newest_.try_emplace(record->kind());
-  const std::size_t index = messages_.size();
+  const auto [place, isNew] = body_->newest.try_emplace(record->kind());
+  const std::size_t index = body_->messages.size();
   const TarnReportingSessionMessage* const recent = record.get();
   try {
-    messages_.append(std::move(record));
+    body_->messages.append(std::move(record));
   } catch (...) {
     if (isNew) {
-      newest_.erase(place);
+      body_->newest.erase(place);
     }
     throw;
   }
-  note(place->second, index, recent);
+  body_->note(place->second, index, recent);
 }
 
-void TarnReportingSessionMessageLog::note(Newest& newest, std::size_t index,
-                                          const TarnReportingSessionMessage* recent) noexcept {
-  newest.index = index;
-  newest.recent = recent;
-  if (newest.kept) [[unlikely]] {
-    newest.kept.reset();
-    --kept_;
+void TarnReportingSessionMessageLog::Body::note(Newest& ofTheKind, std::size_t index,
+                                                const TarnReportingSessionMessage* recent) noexcept {
+  ofTheKind.index = index;
+  ofTheKind.recent = recent;
+  if (ofTheKind.kept) [[unlikely]] {
+    ofTheKind.kept.reset();
+    --kept;
   }
 }
 
 void TarnReportingSessionMessageLog::sort() {
+  if (!body_) return;
+  auto& newest = body_->newest;
   try {
-    if (!messages_.sort()) return;
+    if (!body_->messages.sort()) return;
   } catch (...) {  // for want of memory; records that are pointed to may be gone
-    newest_.clear();
-    kept_ = 0;
+    newest.clear();
+    body_->kept = 0;
     throw;
   }
-  forgetKept();
-  for (auto& [kind, newest] : newest_) {
-    newest = {};
+  body_->forgetKept();
+  for (auto& [kind, ofTheKind] : newest) {
+    ofTheKind = {};
   }
   // What is still missing at the end lay in pages that are lost.
-  const auto isMissing = [&](TarnReportingSessionMessage::Kind kind) { return newest_[kind].index == kNone; };
-  messages_.goBack(isMissing, [&](std::size_t index, const Record& record) {
+  const auto isMissing = [&](TarnReportingSessionMessage::Kind kind) { return newest[kind].index == kNone; };
+  body_->messages.goBack(isMissing, [&](std::size_t index, const Record& record) {
     if (isMissing(record->kind())) {
-      newest_[record->kind()] = {index, record.get(), nullptr};
+      newest[record->kind()] = {index, record.get(), nullptr};
     }
   });
 }
 
 void TarnReportingSessionMessageLog::clear() {
-  messages_.clear();
-  newest_.clear();
-  looked_.reset();
-  kept_ = 0;
+  body_.reset();
 }
 
 const TarnReportingSessionMessage* TarnReportingSessionMessageLog::newest(AudioEventCategory category,
                                                                           AudioEventType type) const {
-  const auto found = newest_.find(TarnReportingSessionMessage::kindOf(category, type));
-  if (found == newest_.end()) return nullptr;
+  if (!body_) return nullptr;
+  Body& body = *body_;
+  const auto found = body.newest.find(TarnReportingSessionMessage::kindOf(category, type));
+  if (found == body.newest.end()) return nullptr;
   Newest& newest = found->second;
-  if (newest.index >= messages_.overflowed()) return newest.recent;
+  if (newest.index >= body.messages.overflowed()) return newest.recent;
   // A producer may have changed what was read back.
-  if (changesSeen_ != messages_.changes()) {
-    changesSeen_ = messages_.changes();
-    forgetKept();
+  if (body.changesSeen != body.messages.changes()) {
+    body.changesSeen = body.messages.changes();
+    body.forgetKept();
   }
   if (newest.kept) return newest.kept.get();
-  looked_ = messages_[newest.index];
-  if (looked_ && kept_ < kMostKept) {
-    newest.kept = looked_;
-    ++kept_;
+  body.looked = body.messages[newest.index];
+  if (body.looked && body.kept < kMostKept) {
+    newest.kept = body.looked;
+    ++body.kept;
   }
-  return looked_.get();
+  return body.looked.get();
 }
 
-void TarnReportingSessionMessageLog::forgetKept() const {
-  for (auto& [key, newest] : newest_) {
-    newest.kept.reset();
+void TarnReportingSessionMessageLog::Body::forgetKept() {
+  for (auto& [kind, ofTheKind] : newest) {
+    ofTheKind.kept.reset();
   }
-  kept_ = 0;
+  kept = 0;
 }
 
 }  // namespace tarn

@@ -26,9 +26,9 @@ class TarnReportingSessionMessageLog {
   using Record = TarnReportingSessionMessageList::Record;
 
   // The ID is for lines about the overflow alone.
-  explicit TarnReportingSessionMessageLog(std::int64_t reporterID) : messages_(reporterID) {}
+  explicit TarnReportingSessionMessageLog(std::int64_t reporterID) : reporterID_(reporterID) {}
 
-  void setAccount(std::shared_ptr<TarnReportingSessionLogAccount> account) { messages_.setAccount(std::move(account)); }
+  void setAccount(std::shared_ptr<TarnReportingSessionLogAccount> account);
   // The record is the newest of its category and type from now on. Without the memory for it nothing has changed.
   void append(Record record);
   // Sorts by time stamp (TarnReportingSessionMessage::sortMessages). Without a pass over the look-up when nothing
@@ -42,10 +42,10 @@ class TarnReportingSessionMessageLog {
   // holds until the next look-up. One hash look-up; a read from the store when the record overflowed and isn't kept.
   const TarnReportingSessionMessage* newest(AudioEventCategory category, AudioEventType type) const;
 
-  // Who changes a record of it in place does so by the list's change().
-  const TarnReportingSessionMessageList& messages() const noexcept { return messages_; }
+  // Who changes a record of it in place does so by the list's change(). Of an empty log it is another list than later.
+  const TarnReportingSessionMessageList& messages() const noexcept;
   // In records, the markers of start and stop included.
-  std::size_t size() const noexcept { return messages_.size(); }
+  std::size_t size() const noexcept { return messages().size(); }
 
  private:
   static constexpr std::size_t kNone = static_cast<std::size_t>(-1);
@@ -58,16 +58,25 @@ class TarnReportingSessionMessageLog {
   // Kinds whose overflowed record is kept in memory, at the cost of a record each.
   static constexpr std::size_t kMostKept = 256;
 
-  // Replaces what was the newest record of a kind, and lets go of its copy.
-  void note(Newest& newest, std::size_t index, const TarnReportingSessionMessage* recent) noexcept;
-  // Lets go of all copies: a sort moved the records, or a producer changed one.
-  void forgetKept() const;
+  // What a log has with its first record and until it is cleared: most sessions of a client that has thousands never
+  // get a message.
+  struct Body {
+    explicit Body(std::int64_t reporterID) : messages(reporterID) {}
+    // Replaces what was the newest record of a kind, and lets go of its copy.
+    void note(Newest& newest, std::size_t index, const TarnReportingSessionMessage* recent) noexcept;
+    // Lets go of all copies: a sort moved the records, or a producer changed one.
+    void forgetKept();
 
-  TarnReportingSessionMessageList messages_;
-  mutable std::unordered_map<TarnReportingSessionMessage::Kind, Newest> newest_;
-  mutable std::size_t kept_ = 0;
-  mutable std::uint64_t changesSeen_ = 0;  // of the records that are kept here
-  mutable Record looked_;
+    TarnReportingSessionMessageList messages;
+    std::unordered_map<TarnReportingSessionMessage::Kind, Newest> newest;
+    std::size_t kept = 0;
+    std::uint64_t changesSeen = 0;  // of the records that are kept here
+    Record looked;
+  };
+
+  const std::int64_t reporterID_;
+  std::shared_ptr<TarnReportingSessionLogAccount> account_;
+  std::unique_ptr<Body> body_;
 };
 
 }  // namespace tarn

@@ -21,7 +21,7 @@ class FakeConnection final : public platform::Connection, public std::enable_sha
   // The interface.
   std::int32_t processIdentifier() const override { return processIdentifier_; }
   std::int64_t number() const override { return number_; }
-  std::uint32_t userIdentifier() const override { return user_; }
+  std::uint32_t user() const noexcept override { return user_; }
   std::string description() const override;
   void setExportedObject(std::shared_ptr<platform::TarnReportingServiceProtocol> object) override;
   void setInterruptionHandler(Handler handler) override;

@@ -4,6 +4,7 @@
 
 #include <cstddef>
 #include <functional>
+#include <limits>
 #include <map>
 #include <mutex>
 #include <string>
@@ -46,7 +47,10 @@ class FakeOverflowStore final : public platform::OverflowStore {
   }
 
   // Controls.
-  void setBounds(std::size_t bytesOfSession, std::size_t bytesInAll) { bounds_ = {bytesOfSession, bytesInAll}; }
+  void setBounds(std::size_t bytesOfSession, std::size_t bytesInAll,
+                 std::size_t bytesOfUser = std::numeric_limits<std::size_t>::max()) {
+    bounds_ = {bytesOfSession, bytesInAll, bytesOfUser};
+  }
   void setFull(bool isFull) { isFull_ = isFull; }
   void setFailsReads(bool fails) { failsReads_ = fails; }
   // Called for each block that is written with the bytes that are kept now.

@@ -163,8 +163,8 @@ std::size_t Encoder::beginFrame() {
   return header;
 }
 
-void Encoder::endFrame(std::size_t header) {
-  std::size_t length = out_.size() - header - kFrameHeaderBytes;
+void Encoder::endFrame(std::size_t header, std::size_t bytesToCome) {
+  std::size_t length = out_.size() - header - kFrameHeaderBytes + bytesToCome;
   for (std::size_t i = 0; i < kFrameHeaderBytes; ++i, length >>= 8U) {
     out_[header + i] = static_cast<char>(length & 0xFFU);
   }
@@ -193,14 +193,13 @@ void Encoder::reply(std::uint64_t id, std::initializer_list<plist::ValueView> re
   endFrame(header);
 }
 
-void Encoder::replyWithNumbers(std::uint64_t id, std::size_t count, std::string_view encoded) {
+void Encoder::replyWithNumbers(std::uint64_t id, std::size_t count, std::size_t bytes) {
   const std::size_t header = beginFrame();
   appendHead(out_, Major::Array, 3);
   appendHead(out_, Major::Unsigned, id);
   out_.push_back(kNull);
   appendHead(out_, Major::Array, count);
-  out_.append(encoded);
-  endFrame(header);
+  endFrame(header, bytes);
 }
 
 void Encoder::numbers(std::span<const std::int64_t> numbers) {

@@ -38,17 +38,17 @@ class Encoder {
   void request(std::uint64_t id, const Request& request);
   // One frame each: [id, null, results...] and [id, [domain, code, text]].
   void reply(std::uint64_t id, std::initializer_list<plist::ValueView> results = {});
-  // The result is one array of so many numbers, which numbers() has made bytes of, in one call or in several.
-  void replyWithNumbers(std::uint64_t id, std::size_t count, std::string_view encoded);
-  // Numbers alone, without a head: for a long list that is encoded in pieces, into a buffer of its own.
+  // The frame up to its result, one array of so many numbers. Those come next, from numbers(), so many bytes in all.
+  void replyWithNumbers(std::uint64_t id, std::size_t count, std::size_t bytes);
+  // Numbers alone, without a head: for a long list that is encoded in pieces, into buffers of its own.
   void numbers(std::span<const std::int64_t> numbers);
   // A text that isn't UTF-8 is mended: each wrong byte becomes U+FFFD.
   void errorReply(std::uint64_t id, std::string_view domain, std::int64_t code, std::string_view text);
 
  private:
-  // Makes room for the length and returns where it stands; endFrame fills it in.
+  // Makes room for the length and returns where it stands; endFrame fills it in, with what is still to come.
   std::size_t beginFrame();
-  void endFrame(std::size_t header);
+  void endFrame(std::size_t header, std::size_t bytesToCome = 0);
 
   std::string& out_;
 };

@@ -25,9 +25,7 @@ std::span<std::byte> FrameBuffer::space() {
   if (wanted > capacity_ || wanted * 4 <= capacity_) {
     resize(wanted);
   } else if (pending == 0 || capacity_ - end_ < kGulpBytes / 2) {
-    std::memmove(bytes_.get(), bytes_.get() + begin_, pending);
-    begin_ = 0;
-    end_ = pending;
+    moveToFront();
   }
   return {bytes_.get() + end_, capacity_ - end_};
 }
@@ -54,16 +52,21 @@ void FrameBuffer::release() noexcept {
   }
 }
 
-void FrameBuffer::resize(std::size_t capacity) {
+void FrameBuffer::moveToFront() noexcept {
   const std::size_t pending = pendingBytes();
-  std::unique_ptr<std::byte[]> bytes = std::make_unique_for_overwrite<std::byte[]>(capacity);
-  if (pending != 0) {
-    std::memcpy(bytes.get(), bytes_.get() + begin_, pending);
+  if (begin_ != 0 && pending != 0) {
+    std::memmove(bytes_.get(), bytes_.get() + begin_, pending);
   }
-  bytes_ = std::move(bytes);
-  capacity_ = capacity;
   begin_ = 0;
   end_ = pending;
+}
+
+void FrameBuffer::resize(std::size_t capacity) {
+  moveToFront();
+  void* const bytes = plist::detail::allocate(capacity, bytes_.get());
+  static_cast<void>(bytes_.release());
+  bytes_.reset(static_cast<std::byte*>(bytes));
+  capacity_ = capacity;
 }
 
 }  // namespace tarn::wire

@@ -16,6 +16,7 @@
 #include <memory>
 #include <span>
 
+#include "plist/Allocation.h"
 #include "wire/Operation.h"
 
 namespace tarn::wire {
@@ -53,12 +54,14 @@ class FrameBuffer {
   void release() noexcept;
 
  private:
-  // Moves what is pending to the front of new memory of this size.
+  void moveToFront() noexcept;
+  // Moves what is pending to the front, and has the memory grow or shrink to this size: large memory does so in its
+  // place, by pages, so that what lies in it isn't copied.
   void resize(std::size_t capacity);
 
   // Above this a frame is Oversize.
   std::size_t maxFrameBytes_;
-  std::unique_ptr<std::byte[]> bytes_;
+  std::unique_ptr<std::byte, plist::detail::Release> bytes_;
   // Of bytes_; what is pending lies from begin_ to end_.
   std::size_t capacity_ = 0;
   std::size_t begin_ = 0;

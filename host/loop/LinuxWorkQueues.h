@@ -44,6 +44,7 @@ class LinuxWorkQueues final : public platform::WorkQueues {
   // Of the pool's queues; see WorkerPool. The server queue's own work isn't in these.
   void setRoomHandler(WorkerPool::RoomHandler handler) { pool_->setRoomHandler(std::move(handler)); }
   bool isFull() const noexcept { return pool_->isFull(); }
+  bool isCrowded(std::size_t most) noexcept { return pool_->isCrowded(most); }
   std::size_t unfinished() const { return pool_->unfinished(); }
   void afterWhatIsUnfinished(platform::Work done) { pool_->afterWhatIsUnfinished(std::move(done)); }
   [[nodiscard]] bool settle(std::chrono::nanoseconds longest) { return pool_->settle(longest); }

@@ -7,6 +7,7 @@
 
 #include "host/loop/CurrentQueue.h"
 #include "host/system/MemoryReserve.h"
+#include "host/system/ThreadRank.h"
 
 namespace tarn::linux_host {
 
@@ -108,6 +109,8 @@ void WorkerPool::suspend(const std::shared_ptr<Line>& line, nanoseconds longest,
   line->suspension = suspensions_.emplace(std::pair(moment, nextSuspension_++), line).first;
   line->interrupted = true;
   line->next = OwnedWork::of(std::move(next));
+  line->held = line->taken.size() - line->position + line->incoming.size() + 1;
+  held_ += line->held;
   countUnfinished();
   watchNextMoment();
 }
@@ -174,6 +177,10 @@ bool WorkerPool::settle(nanoseconds longest) {
 void WorkerPool::enqueue(const std::shared_ptr<Line>& line, OwnedWork work) {
   line->incoming.push_back(std::move(work));
   line->waiting.fetch_add(1, std::memory_order_relaxed);
+  if (line->suspension) {
+    ++line->held;
+    ++held_;
+  }
   countUnfinished();
   if (!line->scheduled && !line->suspension) {
     schedule(line);
@@ -184,6 +191,17 @@ void WorkerPool::countUnfinished() {
   if (++unfinished_ >= marks_.high) {
     full_.store(true, std::memory_order_relaxed);
   }
+  noteReady();
+}
+
+bool WorkerPool::isCrowded(std::size_t most) noexcept {
+  if (crowded_.load(std::memory_order_relaxed)) return true;
+  if (ready_.load(std::memory_order_relaxed) <= most) return false;
+  const MutexLock lock(mutex_);
+  if (unfinished_ - held_ <= most) return false;
+  crowdEnds_ = most / 2;
+  crowded_.store(true, std::memory_order_relaxed);
+  return true;
 }
 
 void WorkerPool::schedule(const std::shared_ptr<Line>& line) {
@@ -199,6 +217,8 @@ void WorkerPool::endSuspension(Suspensions::iterator suspension) {
   const auto line = std::move(suspension->second);
   suspensions_.erase(suspension);
   line->suspension.reset();
+  held_ -= std::exchange(line->held, 0);
+  noteReady();
   line->waiting.fetch_add(1, std::memory_order_relaxed);
   if (!line->scheduled) {  // else the piece that suspended it still runs
     schedule(line);
@@ -260,6 +280,7 @@ void WorkerPool::watchNextMoment() {
 }
 
 void WorkerPool::serve() {
+  standBack();  // what it works off comes from the server queue, which others wait for
   const MutexLock lock(mutex_);
   bool worked = false;
   for (;;) {
@@ -356,10 +377,13 @@ std::size_t WorkerPool::runTurn(Line& line, OwnedWork next) {
 
 void WorkerPool::account(std::size_t finished) {
   unfinished_ -= finished;
+  noteReady();
   if (unfinished_ == 0) {
     settled_.notifyAll();
   }
-  if (unfinished_ <= marks_.low && full_.exchange(false, std::memory_order_relaxed) && roomHandler_) {
+  const bool hasRoom = unfinished_ <= marks_.low && full_.exchange(false, std::memory_order_relaxed);
+  const bool thinsOut = unfinished_ - held_ <= crowdEnds_ && crowded_.exchange(false, std::memory_order_relaxed);
+  if ((hasRoom || thinsOut) && roomHandler_) {
     mutex_.unlock();
     roomHandler_();
     mutex_.lock();

@@ -41,8 +41,8 @@ class WorkerPool {
   // Pieces of work that are not finished, of all queues: from the high mark on isFull() is true, until the low mark is
   // reached. A piece and the message that it holds take some hundred bytes.
   struct Marks {
-    std::size_t high = 262'144;
-    std::size_t low = 131'072;
+    std::size_t high = 131'072;
+    std::size_t low = 65'536;
     bool operator==(const Marks&) const = default;
   };
   // Called without the pool's lock, often on a pool's thread: it only tells another thread to go on.
@@ -57,8 +57,8 @@ class WorkerPool {
   WorkerPool& operator=(const WorkerPool&) = delete;
   ~WorkerPool() { stop(); }
 
-  // Called each time isFull() has become false again, on a thread of the pool or on that of whoever helps. Set before
-  // start().
+  // Called each time isFull() or isCrowded() has become false again, on a thread of the pool or on that of whoever
+  // helps. Set before start().
   void setRoomHandler(RoomHandler handler) { roomHandler_ = std::move(handler); }
   // Starts the threads, once. Fewer will do when the system has no more to give; false when there is none, and then
   // what is handed over waits until a later call gets one.
@@ -90,6 +90,9 @@ class WorkerPool {
   std::size_t unfinished() const;
   // One load, for each request.
   bool isFull() const noexcept { return full_.load(std::memory_order_relaxed); }
+  // Whether more than `most` pieces wait for a thread; from then on it is true until half as many do. What is suspended
+  // waits for something else and doesn't count. A load or two, mostly.
+  bool isCrowded(std::size_t most) noexcept;
   // Calls `done` once all that is unfinished now is finished, on a thread of the pool or at once on the caller's. It is
   // destroyed uncalled with work that is.
   void afterWhatIsUnfinished(platform::Work done);
@@ -121,6 +124,8 @@ class WorkerPool {
   std::optional<std::chrono::nanoseconds> nextMoment() const TARN_REQUIRES(mutex_);
   // One more; at the high mark the pool is full.
   void countUnfinished() TARN_REQUIRES(mutex_);
+  // After each change of what is unfinished or held.
+  void noteReady() noexcept TARN_REQUIRES(mutex_) { ready_.store(unfinished_ - held_, std::memory_order_relaxed); }
   // If anybody sleeps.
   void wakeOne() TARN_REQUIRES(mutex_);
   // Sees that somebody wakes by the earliest moment, when it has just become earlier.
@@ -137,9 +142,11 @@ class WorkerPool {
   const Marks marks_;
   RoomHandler roomHandler_;
   std::atomic<bool> full_{false};
-  mutable Mutex mutex_;        // guards of the lines, too, what they say
-  ConditionVariable changed_;  // for the sleepers
-  ConditionVariable ended_;    // for the one that is about to look
+  std::atomic<bool> crowded_{false};
+  std::atomic<std::size_t> ready_{0};  // unfinished and not held; written under the lock
+  mutable Mutex mutex_;                // guards of the lines, too, what they say
+  ConditionVariable changed_;          // for the sleepers
+  ConditionVariable ended_;            // for the one that is about to look
   ConditionVariable settled_;
   ConditionVariable turnEnded_;  // for those who help
   std::size_t helpers_ TARN_GUARDED_BY(mutex_) = 0;
@@ -149,6 +156,8 @@ class WorkerPool {
   Suspensions suspensions_ TARN_GUARDED_BY(mutex_);
   std::uint64_t nextSuspension_ TARN_GUARDED_BY(mutex_) = 0;
   std::size_t unfinished_ TARN_GUARDED_BY(mutex_) = 0;
+  std::size_t held_ TARN_GUARDED_BY(mutex_) = 0;       // of these, pieces of lines that are suspended
+  std::size_t crowdEnds_ TARN_GUARDED_BY(mutex_) = 0;  // when so few are ready
   std::vector<std::thread> threads_ TARN_GUARDED_BY(mutex_);
   // Of the sleepers: when each wakes at the latest. There is room for one of each thread.
   std::vector<std::chrono::nanoseconds> wakeUps_ TARN_GUARDED_BY(mutex_);
@@ -165,6 +174,7 @@ struct WorkerPool::Line {
   std::vector<OwnedWork> incoming;
   OwnedWork next;  // what runs first when a suspension is over
   std::optional<Suspensions::iterator> suspension;
+  std::size_t held = 0;    // pieces while suspended, `next` among them
   bool scheduled = false;  // stands in the pool's line or is being run
   bool running = false;
   // Of the thread that runs the line.

@@ -120,7 +120,7 @@ struct Setting {
 
 using Node = const toml::node&;
 using Host = HostConfiguration&;
-constexpr std::array<Setting, 26> kSettings{{
+constexpr std::array<Setting, 27> kSettings{{
     {"tally", "in_use", [](Node node, Host host) { return take(node, host.tally.inUse); }},
     {"rtc", "backends", [](Node node, Host host) { return take(node, host.rtc.backends); }},
     {"rtc", "no_backends", [](Node node, Host host) { return take(node, host.rtc.noBackends); }},
@@ -155,6 +155,8 @@ constexpr std::array<Setting, 26> kSettings{{
      [](Node node, Host host) { return takeWithin<65536, kMostBytes>(node, host.limits.logs.bytesOfSession); }},
     {"limits", "log_bytes",
      [](Node node, Host host) { return takeWithin<65536, kMostBytes>(node, host.limits.logs.bytesInAll); }},
+    {"limits", "log_share_per_user",
+     [](Node node, Host host) { return takeWithin<65536, kMostBytes>(node, host.limits.logs.bytesOfUser); }},
     {"limits", "log_bytes_per_connection",
      [](Node node, Host host) {
        return takeWithin<65536, kMostBytes>(node, host.limits.quotas.logBytesPerConnection);

@@ -165,7 +165,7 @@ class ConnectionHost {
   // Cost of the requests that are served before the sockets are looked at again, in units of about a microsecond: a
   // client that sends a request now waits for this much of the others'. A lone client need not give way, so a look at
   // the sockets is shared by more requests.
-  static constexpr std::int64_t kCostPerTurn = 128;
+  static constexpr std::int64_t kCostPerTurn = 64;
   static constexpr std::int64_t kCostPerTurnAlone = 512;
   // Within the time that a half frame may take: one that is late is cut off at most an eighth later.
   static constexpr int kLooksAtHalfFrames = 8;

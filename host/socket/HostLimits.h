@@ -45,8 +45,10 @@ struct HostLimits {
     bool operator==(const Quotas&) const = default;
   };
   Quotas quotas;
-  // Memory that the messages of one session, and of all, take before the oldest are moved to a file.
-  platform::OverflowStore::Bounds logs{std::size_t{64} << 20, std::size_t{256} << 20};
+  // Memory that the messages of one session, of all, and of all of a user take before the oldest are moved to a file.
+  // The last keeps the service small whatever one user does, with one session or with thousands; the heap that so many
+  // small blocks lie in may be twice as large. A session's own bound counts where a user may have more.
+  platform::OverflowStore::Bounds logs{std::size_t{64} << 20, std::size_t{256} << 20, std::size_t{32} << 20};
   // How long a frame that was begun may wait for the rest; then its connection is cut off.
   std::chrono::milliseconds halfFrameTime{30000};
   // Up to so many open connections keep their input buffers while they are quiet, which spares busy ones the making of

@@ -2,8 +2,8 @@
 
 #include <sys/socket.h>
 
+#include <algorithm>
 #include <cerrno>
-#include <utility>
 
 #include "host/socket/Ledger.h"
 #include "host/socket/NumbersReply.h"
@@ -13,6 +13,8 @@ namespace tarn::linux_host {
 
 namespace {
 
+// A text that has so many bytes gets no further reply.
+constexpr std::size_t kTextBytes = 32768;
 // Room that a connection keeps while it is quiet.
 constexpr std::size_t kKeptBytes = 65536;
 
@@ -20,14 +22,19 @@ constexpr std::size_t kKeptBytes = 65536;
 
 template <class Encode>
 void ReplyOutput::appendWhole(const Encode& encode) {
-  const std::size_t before = bytes_.size();
+  if (texts_.empty() || texts_.back().size() >= kTextBytes) {
+    texts_.emplace_back();
+  }
+  std::string& text = texts_.back();
+  const std::size_t before = text.size();
   try {
-    wire::Encoder encoder(bytes_);
+    wire::Encoder encoder(text);
     encode(encoder);
   } catch (...) {
-    bytes_.resize(before);
+    text.resize(before);
     throw;
   }
+  unsentBytes_ += text.size() - before;
   ++unsentReplies_;
 }
 
@@ -35,27 +42,31 @@ void ReplyOutput::append(std::uint64_t id, std::initializer_list<plist::ValueVie
   appendWhole([&](wire::Encoder& encoder) { encoder.reply(id, results); });
 }
 
-void ReplyOutput::append(std::uint64_t id, const NumbersReply& reply) {
-  appendWhole([&](wire::Encoder& encoder) { encoder.replyWithNumbers(id, reply.count(), reply.encoded()); });
-}
-
 void ReplyOutput::append(std::uint64_t id, const platform::RemoteError& error) {
   appendWhole([&](wire::Encoder& encoder) { encoder.errorReply(id, error.domain, error.code, error.text); });
+}
+
+void ReplyOutput::append(std::uint64_t id, NumbersReply& reply) {
+  appendWhole([&](wire::Encoder& encoder) { encoder.replyWithNumbers(id, reply.count(), reply.bytes()); });
+  texts_.splice(texts_.end(), reply.encoded());
+  unsentBytes_ += reply.bytes();
 }
 
 void ReplyOutput::countDropped() noexcept {
   ++ledger_.repliesDropped;
 }
 
-bool ReplyOutput::sendSome(int socket) {
-  while (unsentBytes() != 0) {
-    const ssize_t bytes = ::send(socket, bytes_.data() + sentBytes_, unsentBytes(), MSG_NOSIGNAL | MSG_DONTWAIT);
+bool ReplyOutput::sendSome(int socket, std::size_t most) {
+  stalled_ = false;
+  for (std::size_t left = most; unsentBytes_ != 0 && left != 0;) {
+    const std::string& first = texts_.front();
+    const std::size_t size = std::min(left, first.size() - sentOfFirst_);
+    const ssize_t bytes = ::send(socket, first.data() + sentOfFirst_, size, MSG_NOSIGNAL | MSG_DONTWAIT);
     if (bytes >= 0) {
-      sentBytes_ += static_cast<std::size_t>(bytes);
+      take(static_cast<std::size_t>(bytes));
+      left -= static_cast<std::size_t>(bytes);
     } else if (errno == EAGAIN) {
-      if (sentBytes_ > bytes_.size() / 2) {
-        bytes_.erase(0, std::exchange(sentBytes_, 0));
-      }
+      stalled_ = true;
       return true;
     } else if (errno != EINTR) {
       resetSeen_ = errno == ECONNRESET;
@@ -63,18 +74,35 @@ bool ReplyOutput::sendSome(int socket) {
       return false;
     }
   }
-  ledger_.repliesSent += std::exchange(unsentReplies_, 0);
-  drop();
+  if (unsentBytes_ == 0) {
+    ledger_.repliesSent += std::exchange(unsentReplies_, 0);
+    drop();
+  }
   return true;
+}
+
+void ReplyOutput::take(std::size_t bytes) noexcept {
+  sentBytes_ += bytes;
+  unsentBytes_ -= bytes;
+  sentOfFirst_ += bytes;
+  if (sentOfFirst_ == texts_.front().size() && texts_.size() > 1) {
+    texts_.pop_front();
+    sentOfFirst_ = 0;
+  }
 }
 
 void ReplyOutput::drop() noexcept {
   ledger_.repliesDropped += std::exchange(unsentReplies_, 0);
-  sentBytes_ = 0;
-  if (bytes_.capacity() > kKeptBytes) {
-    bytes_ = std::string();
+  unsentBytes_ = 0;
+  sentOfFirst_ = 0;
+  while (texts_.size() > 1) {
+    texts_.pop_front();
+  }
+  if (texts_.empty()) return;
+  if (texts_.front().capacity() > kKeptBytes) {
+    texts_.clear();
   } else {
-    bytes_.clear();
+    texts_.front().clear();
   }
 }
 

@@ -19,6 +19,8 @@ namespace {
 constexpr std::string_view kModule = "SocketConnection";
 // Received bytes in a unit of cost.
 constexpr std::size_t kReceivedBytesPerCost = 8192;
+// Bytes of replies that were sent since the turn before, likewise.
+constexpr std::size_t kSentBytesPerCost = 4096;
 // Of the end of a connection.
 constexpr std::size_t kEndCost = 24;
 
@@ -172,7 +174,8 @@ ShareHolder::Turn SocketConnection::takeTurn(std::int64_t credit) {
       more = true;
     }
   }
-  return {lane_.spent() + std::exchange(ringCost_, 0), more};
+  const auto sent = static_cast<std::int64_t>(output_.takeSentBytes() / kSentBytesPerCost);
+  return {lane_.spent() + sent + std::exchange(ringCost_, 0), more};
 }
 
 void SocketConnection::countSessions() {

@@ -56,7 +56,7 @@ class SocketConnection final : public platform::Connection,
   std::int32_t processIdentifier() const override { return client_.process; }
   // As the log's lines have it.
   std::int64_t number() const override { return static_cast<std::int64_t>(client_.connection); }
-  std::uint32_t userIdentifier() const override { return client_.user; }
+  std::uint32_t user() const noexcept override { return party().user; }
   const LogClient& client() const noexcept { return client_; }
   // With number, process, user and executable of the client, as they were when it connected: the client may have become
   // another program since.
@@ -72,7 +72,6 @@ class SocketConnection final : public platform::Connection,
   // For a user that has as many connections as it may: instead of setting it up and resuming it. It answers every
   // request but `status` with this text (error 4) until the client ends it, so that a client learns why.
   void refuse(std::string why);
-  std::uint32_t user() const noexcept { return party().user; }
 
   // The socket became ready: asks for a turn, or while requests aren't taken looks only for a `status` at the head.
   void handleEvents(std::uint32_t events) override;
@@ -146,13 +145,15 @@ class SocketConnection final : public platform::Connection,
 
   // Sends the reply, or counts it as dropped when nobody can get it any more.
   template <class Content>
-  void reply(std::uint64_t id, const Content& content) noexcept;
+  void reply(std::uint64_t id, Content& content) noexcept;
   // In the place of a reply that is too large for the memory that there is.
   void replyShortly(std::uint64_t id) noexcept;
   // With the turn's end, or at once when much waits.
   void flushSoon() noexcept;
   // In pieces, ahead of the connection's next request.
   void sendRest(NumbersReply numbers) noexcept;
+  // Bytes that the next flush sends.
+  std::size_t sentAtOnce() const noexcept;
   // Whether the replies had better go out with those of the next turns.
   bool gathersReplies();
 

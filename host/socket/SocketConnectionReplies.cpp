@@ -1,6 +1,7 @@
 // The replies of SocketConnection: how they are encoded, gathered and sent.
 #include <sys/epoll.h>
 
+#include <algorithm>
 #include <new>
 #include <utility>
 
@@ -16,6 +17,8 @@ constexpr std::size_t kEarlyFlushBytes = 262144;
 // While a client has more requests to be served, its replies are gathered up to so many bytes and for so many turns.
 constexpr std::size_t kGatheredReplyBytes = 4096;
 constexpr int kMostFlushesPutOff = 8;
+// Bytes that are sent at once: the rest goes out after others have had their turn.
+constexpr std::size_t kSentAtOnce = 65536;
 // Numbers of a reply that are encoded at once, and in a unit of cost.
 constexpr std::size_t kNumbersAtOnce = 2048;
 constexpr std::size_t kNumbersPerCost = 128;
@@ -23,7 +26,7 @@ constexpr std::size_t kNumbersPerCost = 128;
 }  // namespace
 
 template <class Content>
-void SocketConnection::reply(std::uint64_t id, const Content& content) noexcept {
+void SocketConnection::reply(std::uint64_t id, Content& content) noexcept {
   if ((state_ != State::Open && state_ != State::Ending) || output_.broken()) {
     output_.countDropped();
     return;
@@ -43,7 +46,8 @@ void SocketConnection::refuseRequest(std::uint64_t id, wire::ErrorCode code, std
   }
   lane_.spend(1);
   host_.ledger.countRefusal(code);
-  reply(id, platform::RemoteError{wire::kErrorDomain, static_cast<std::int64_t>(code), std::move(why)});
+  const platform::RemoteError error{wire::kErrorDomain, static_cast<std::int64_t>(code), std::move(why)};
+  reply(id, error);
 }
 
 void SocketConnection::refuseForMemory(std::uint64_t id) noexcept {
@@ -121,6 +125,14 @@ bool SocketConnection::gathersReplies() {
   return false;
 }
 
+// What is beyond the bound is sent at any rate: only what the system doesn't take was left unread. Nothing comes after
+// the connection's last flush, nor after the process's.
+std::size_t SocketConnection::sentAtOnce() const noexcept {
+  if (state_ != State::Open || !host_.gathersReplies) return ReplyOutput::kEverything;
+  const std::size_t bound = host_.limits.maxUnreadReplyBytes;
+  return std::max(kSentAtOnce, output_.unsentBytes() - std::min(output_.unsentBytes(), bound));
+}
+
 void SocketConnection::flush() {
   const LogClientScope scope(client_);
   flushAsked_ = gathersReplies();
@@ -128,7 +140,7 @@ void SocketConnection::flush() {
     host_.loop.flushLater(shared_from_this());
     return;
   }
-  if (!socket_ || !output_.sendSome(socket_.get())) return;
+  if (!socket_ || !output_.sendSome(socket_.get(), sentAtOnce())) return;
   const std::size_t unsent = output_.unsentBytes();
   if (state_ != State::Open) {
     if (unsent > host_.limits.maxUnreadReplyBytes) {
@@ -136,10 +148,14 @@ void SocketConnection::flush() {
     }
   } else if (unsent > host_.limits.maxUnreadReplyBytes) {
     cut(CutReason::UnreadReplies, [&] { return std::to_string(unsent) + " bytes of replies left unread"; });
-  } else if (unsent != 0) {
+  } else if (output_.stalled()) {
     watch(watchedEvents_ | EPOLLOUT);
   } else {
     watch(watchedEvents_ & ~std::uint32_t{EPOLLOUT});
+    if (unsent != 0) {
+      flushAsked_ = true;
+      host_.loop.flushLater(shared_from_this());
+    }
   }
 }
 

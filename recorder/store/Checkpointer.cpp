@@ -1,11 +1,32 @@
 #include "recorder/store/Checkpointer.h"
 
+#include <sched.h>
 #include <sqlite3.h>
+#include <sys/resource.h>
 
 #include <exception>
 #include <utility>
 
 namespace tarn::recorder {
+
+namespace {
+
+constexpr int kBack = 10;
+
+// The thread has the rank of the writer, which made it and goes ahead of the others. What it does for long may wait for
+// all of them.
+void standBack() {
+  const int policy = ::sched_getscheduler(0);
+  sched_param rank{};
+  if (policy == SCHED_OTHER) {
+    static_cast<void>(::setpriority(PRIO_PROCESS, 0, ::getpriority(PRIO_PROCESS, 0) + kBack));
+  } else if (::sched_getparam(0, &rank) == 0 && rank.sched_priority > ::sched_get_priority_min(policy)) {
+    --rank.sched_priority;
+    static_cast<void>(::sched_setparam(0, &rank));
+  }
+}
+
+}  // namespace
 
 void Checkpointer::open(const std::string& file) {
   close();
@@ -65,6 +86,7 @@ void Checkpointer::close() noexcept {
 }
 
 void Checkpointer::run() {
+  standBack();
   mutex_.lock();
   for (;;) {
     changed_.wait(mutex_, [this]() TARN_REQUIRES(mutex_) { return busy_ || stopping_; });

@@ -48,8 +48,8 @@ class TarnReportingRtcMirror : public std::enable_shared_from_this<TarnReporting
   };
   // The session as it was when it was stopped.
   struct Stopped {
-    TarnReportingRtcMessages messages;  // of what is in memory, copies of those that are addressed to the worker
-    bool hadMessages;                   // whether the log held any at all
+    TarnReportingRtcMessages messages;
+    bool hadMessages;  // whether the log held any at all
     AudioServiceType serviceType;
     std::int64_t reporterID;
   };

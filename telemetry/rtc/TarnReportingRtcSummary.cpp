@@ -53,7 +53,8 @@ class Table {
 
 }  // namespace
 
-bool TarnReportingIsAddressedToRtc(const TarnReportingSessionMessage& message) {
+bool TarnReportingIsForRtcSummary(const TarnReportingSessionMessage& message) {
+  if (message.isRedundant() || !message.isSessionStarted()) return false;
   const auto& destinations = message.destinationWorkers();
   return destinations.empty() || std::find(destinations.begin(), destinations.end(), kWorker) != destinations.end();
 }
@@ -63,23 +64,22 @@ TarnReportingRtcSummary TarnReportingMakeRtcSummary(AudioServiceType serviceType
   TarnReportingRtcSummary summary;
   Table table;
   table.append(kSummaryEvent, static_cast<unsigned>(serviceType));
-  const auto take = [&](const std::shared_ptr<TarnReportingSessionMessage>& message) {
-    if (message->isRedundant() || !message->isSessionStarted()) return;
+  const auto take = [&](const plist::Dictionary& payload) {
     summary.complete = summary.complete && table.bytes() < longestText;
     if (!summary.complete) return;
-    for (const plist::Dictionary::Entry& entry : message->message()) {
+    for (const plist::Dictionary::Entry& entry : payload) {
       table.append(entry.key, entry.value);
     }
   };
   for (const auto& page : stopped.pages) {
     if (!summary.complete) break;
     for (const auto& message : page->read()) {
-      if (TarnReportingIsAddressedToRtc(*message)) {
-        take(message);
+      if (TarnReportingIsForRtcSummary(*message)) {
+        take(message->message());
       }
     }
   }
-  std::for_each(stopped.messages.begin(), stopped.messages.end(), take);
+  std::for_each(stopped.payloads.begin(), stopped.payloads.end(), take);
   summary.payload = table.payload();
   return summary;
 }

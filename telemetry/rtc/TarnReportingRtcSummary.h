@@ -21,7 +21,7 @@ namespace tarn {
 
 struct TarnReportingRtcSummary {
   // A payload has its limits, and so does what takes it in: after so many bytes of keys and values no more messages
-  // are added. As JSON a byte may become six, and what stands in for the service takes no text of a gigabyte.
+  // are added. On its way to the disk an event is in memory several times, and as JSON a byte may become six.
   static constexpr std::size_t kLongestText = std::size_t{128} << 20U;
 
   // "Tarn_Session_Summary_Event" is the number of the service type; every other value is the text of a list with
@@ -30,19 +30,19 @@ struct TarnReportingRtcSummary {
   bool complete = true;  // false: the limit was reached
 };
 
-// Whether the Rtc worker is among those that the message is for. One without destinations is for everyone.
-bool TarnReportingIsAddressedToRtc(const TarnReportingSessionMessage& message);
+// Whether a logged message belongs into the summary: not when it is redundant, when it came while the session was not
+// started, or when it is addressed to other workers. One without destinations is for everyone.
+bool TarnReportingIsForRtcSummary(const TarnReportingSessionMessage& message);
 
-// The messages of a session that was stopped: those of the pages, of which not all need be for the worker, then the
-// others, which are. A page is read when its messages are added, one after the other.
+// The messages of a session that was stopped: those of the pages, of which not all need belong into the summary, then
+// the payloads of the others, which do. A page is read when its messages are added, one after the other.
 struct TarnReportingRtcMessages {
   std::vector<std::shared_ptr<const TarnReportingSessionMessagePage>> pages;
-  std::vector<std::shared_ptr<TarnReportingSessionMessage>> messages;
+  std::vector<plist::Dictionary> payloads;
 };
 
-// Redundant messages and those that came while the session was not started are left out. A page that can't be read back
-// adds nothing. The limit is looked at between two messages, so the last one may exceed it. Linear in the values; the
-// pages' messages are in memory one page at a time.
+// A page that can't be read back adds nothing. The limit is looked at between two messages, so the last one may exceed
+// it. Linear in the values; the pages' messages are in memory one page at a time.
 TarnReportingRtcSummary TarnReportingMakeRtcSummary(AudioServiceType serviceType,
                                                     const TarnReportingRtcMessages& stopped,
                                                     std::size_t longestText = TarnReportingRtcSummary::kLongestText);

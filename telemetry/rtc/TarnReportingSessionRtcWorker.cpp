@@ -17,17 +17,17 @@ constexpr std::string_view kServiceNameSuffix = "_session";
 // For which a stop waits at the most while another thread carries out the start, which asks for backends and no more.
 constexpr std::chrono::milliseconds kStartHelp{20};
 
-// The destinations are read here: a copy is addressed to everyone.
+// Of a copy only the payload is kept: there may be hundreds of thousands, and they wait for their queue.
 TarnReportingRtcMirror::Stopped snapshotOf(const TarnReportingSession& session) {
   const TarnReportingSessionMessageList& log = session.messages();
   TarnReportingRtcMirror::Stopped stopped{{}, !log.empty(), session.serviceType(), session.reporterID()};
   stopped.messages.pages = log.pages();
-  std::vector<std::shared_ptr<TarnReportingSessionMessage>>& copies = stopped.messages.messages;
-  copies.reserve(log.recent().size());
+  std::vector<plist::Dictionary>& payloads = stopped.messages.payloads;
+  payloads.reserve(log.recent().size());
   for (const auto& message : log.recent()) {
-    auto copy = message->copyWithZone();
-    if (TarnReportingIsAddressedToRtc(*message)) {
-      copies.push_back(std::move(copy));
+    const auto copy = message->copyWithZone();
+    if (TarnReportingIsForRtcSummary(*message)) {
+      payloads.push_back(std::move(copy->mutableMessage()));
     }
   }
   return stopped;

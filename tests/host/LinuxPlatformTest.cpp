@@ -134,6 +134,17 @@ TEST_F(LinuxPlatformTest, RequestsWaitWhileTheWorkersQueuesAreFull) {
   expectPauseUntil([this] { letGo_.set_value(); });
 }
 
+TEST_F(LinuxPlatformTest, WhoKeepsTheWorkersQueuesBusyWaitsBeforeTheyAreFull) {
+  configuration_.recorder.highWaterEvents = 12;
+  startAndServe();
+  ASSERT_TRUE(TestClient(socket()).status());  // the user that most was done for lately
+  const auto queue = heldQueue();
+  for (int piece = 0; piece < 256; ++piece) {
+    queue->async([] {});
+  }
+  expectPauseUntil([this] { letGo_.set_value(); });
+}
+
 TEST_F(LinuxPlatformTest, SettleIsAnsweredWhenWhatTheQueuesHoldAndTheRecorderHasIsCommitted) {
   configuration_.recorder.groupTime = configuration_.recorder.quietTime = 1h;
   startAndServe();

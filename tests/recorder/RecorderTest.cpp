@@ -276,14 +276,20 @@ TEST_F(RecorderTest, IsCrowdedFromThreeQuartersOfTheHighMarkUntilTheLowMark) {
   std::atomic<int> calls{0};
   recorder_->setRoomHandler([&] { ++calls; });
   recorder_->start();
+  EXPECT_EQ(recorder_->roomUntilCrowded(), 9U);
   recordMany(8);
   EXPECT_FALSE(recorder_->isCrowded());
+  EXPECT_EQ(recorder_->roomUntilCrowded(), 1U);
   recordMany(1);
   EXPECT_TRUE(recorder_->isCrowded());
+  EXPECT_EQ(recorder_->roomUntilCrowded(), 0U);
   EXPECT_FALSE(recorder_->isFull());
+  recordMany(1);
+  EXPECT_EQ(recorder_->roomUntilCrowded(), 0U);
   ASSERT_TRUE(flush());
   EXPECT_TRUE(eventually([&] { return calls == 1; }));
   EXPECT_FALSE(recorder_->isCrowded());
+  EXPECT_EQ(recorder_->roomUntilCrowded(), 9U);
 }
 
 TEST_F(RecorderTest, BytesFillItToo) {

@@ -67,7 +67,7 @@ class AccountRound : public Slices {
 
 TEST_F(Slices, ABroadcastReachesEverySessionAndIsAnsweredAtItsEnd) {
   runSessions(20);
-  queue_->setTurn(4);
+  queue_->setTurn(8);
   handOver(std::nullopt);
   ASSERT_TRUE(queue_->runOne());
   EXPECT_EQ(sessionsWithAMessage(20), 2);

@@ -86,7 +86,8 @@ TEST(Encoder, RepliesAreNullAndResultsBehindTheID) {
   const std::int64_t numbers[] = {1, -1};
   std::string encoded;
   Encoder(encoded).numbers(numbers);
-  encoder.replyWithNumbers(8, 2, encoded);
+  encoder.replyWithNumbers(8, 2, encoded.size());
+  out += encoded;
   EXPECT_EQ(toHex(out),
             "04000000"
             "8307f6f5"

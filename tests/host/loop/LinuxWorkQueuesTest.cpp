@@ -340,6 +340,88 @@ TEST_F(LinuxWorkQueuesTest, IsFullFromTheHighMarkToTheLowOneAndTellsSo) {
   EXPECT_FALSE(queues.isFull());
 }
 
+// Occupies a queue's thread until it ends.
+class Blocker {
+ public:
+  explicit Blocker(platform::WorkQueue& queue) {
+    queue.async([this] {
+      begun_.set_value();
+      end_.get_future().get();
+    });
+    begun_.get_future().get();
+  }
+  Blocker(const Blocker&) = delete;
+  Blocker& operator=(const Blocker&) = delete;
+  ~Blocker() { end(); }
+  void end() {
+    if (!std::exchange(ended_, true)) {
+      end_.set_value();
+    }
+  }
+
+ private:
+  std::promise<void> begun_;
+  std::promise<void> end_;
+  bool ended_ = false;
+};
+
+TEST_F(LinuxWorkQueuesTest, IsCrowdedByWhatWaitsForAThreadUntilHalfOfItIsDoneAndTellsSo) {
+  std::atomic<int> told{0};
+  queues_.setRoomHandler([&] { told += queues_.isCrowded(10) ? 100 : 1; });
+  const auto queue = make();
+  Blocker blocker(*queue);  // counts too
+  for (int i = 0; i < 9; ++i) {
+    queue->async([] {});
+  }
+  EXPECT_FALSE(queues_.isCrowded(10));
+  queue->async([] {});
+  EXPECT_TRUE(queues_.isCrowded(10));
+  EXPECT_TRUE(queues_.isCrowded(1000));  // it stays so
+  EXPECT_FALSE(queues_.isFull());
+  EXPECT_EQ(told, 0);
+  blocker.end();
+  EXPECT_TRUE(queues_.settle(20s));
+  EXPECT_TRUE(eventually([&] { return told == 1; }));
+  EXPECT_FALSE(queues_.isCrowded(10));
+}
+
+TEST_F(LinuxWorkQueuesTest, WhatNobodyWasToldIsCrowdedTellsNoRoom) {
+  std::atomic<int> told{0};
+  queues_.setRoomHandler([&] { ++told; });
+  const auto queue = make();
+  Blocker blocker(*queue);
+  for (int i = 0; i < 100; ++i) {
+    queue->async([] {});
+  }
+  blocker.end();
+  EXPECT_TRUE(queues_.settle(20s));
+  EXPECT_EQ(told, 0);
+}
+
+TEST_F(LinuxWorkQueuesTest, WhatIsSuspendedCrowdsNobodyBeforeItMayGoOn) {
+  const auto queue = makeSuspendable();
+  std::promise<void> suspended;
+  queue->async([&] {
+    queue->async([] {});
+    queue->suspend(1h, [] {});
+    suspended.set_value();
+  });
+  queue->async([] {});
+  suspended.get_future().get();
+  EXPECT_TRUE(eventually([&] { return queues_.unfinished() == 3; }));
+  for (int i = 0; i < 20; ++i) {
+    queue->async([] {});
+  }
+  EXPECT_FALSE(queues_.isCrowded(0));
+  Blocker other(*make());
+  EXPECT_FALSE(queues_.isCrowded(1));
+  EXPECT_TRUE(queues_.isCrowded(0));
+  other.end();
+  queue->resume();
+  EXPECT_TRUE(queues_.settle(20s));
+  EXPECT_TRUE(eventually([&] { return !queues_.isCrowded(0); }));
+}
+
 TEST_F(LinuxWorkQueuesTest, TheEndDestroysWhatIsSuspendedDelayedOrCame) {
   const auto held = std::make_shared<int>(0);
   const std::weak_ptr<int> watched = held;

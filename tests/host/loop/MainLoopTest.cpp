@@ -87,9 +87,9 @@ TEST_F(MainLoopTest, WhatRunsOutOfMemoryEndsAloneAndTheLoopGoesOn) {
     void flush() override { throw std::bad_alloc(); }
   };
   const auto failing = std::make_shared<Failing>();
-  bool hookFailed = false;
-  running_.loop.addTurnHook([&] {
-    if (!std::exchange(hookFailed, true)) throw std::bad_alloc();
+  const auto hookFailed = std::make_shared<bool>(false);  // turns go on after this test's body
+  running_.loop.addTurnHook([hookFailed] {
+    if (!std::exchange(*hookFailed, true)) throw std::bad_alloc();
   });
   ASSERT_TRUE(running_.loop.watch(ours_.get(), EPOLLIN | EPOLLET, failing).ok());
   sendByte();
@@ -99,8 +99,10 @@ TEST_F(MainLoopTest, WhatRunsOutOfMemoryEndsAloneAndTheLoopGoesOn) {
     running_.loop.flushLater(counter_);
   });
   EXPECT_TRUE(eventually([&] { return counter_->flushes == 1; }));
-  running_.onQueue([&] { running_.loop.unwatch(ours_.get()); });
-  EXPECT_TRUE(hookFailed);
+  EXPECT_TRUE(running_.onQueue([&] {
+    running_.loop.unwatch(ours_.get());
+    return *hookFailed;
+  }));
 }
 
 TEST_F(MainLoopTest, FlushesWhatIsReadyWhenItIsStopped) {

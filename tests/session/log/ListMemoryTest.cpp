@@ -268,6 +268,99 @@ TEST_F(ListMemory, AssignedListHasWhatTheOtherHadAndNothingElse) {
   EXPECT_EQ(usage().overflowing, 1U);
 }
 
+class ListsOfUsers : public ListMemory {
+ protected:
+  static std::shared_ptr<TarnReportingSessionLogAccount> accountOf(std::uint32_t user) {
+    return ProcessState::of<TarnReportingSessionLogMemory>()->makeAccount(user);
+  }
+  static List listOf(const std::shared_ptr<TarnReportingSessionLogAccount>& account) {
+    List list(1);
+    list.setAccount(account);
+    return list;
+  }
+};
+
+TEST_F(ListsOfUsers, BoundOfAUserHoldsToTheByteForAllOfTheUsersClients) {
+  setBounds(64 * kKilobyte, kNoBound, 16 * kKilobyte);
+  List one = listOf(accountOf(7));
+  List other = listOf(accountOf(7));
+  fill(one, 10);
+  fill(other, 6);
+  EXPECT_EQ(platform_.overflow.writesTried(), 0U);
+  fill(other, 1, 6);
+  EXPECT_EQ(one.overflowed(), 8U);  // the larger one
+  EXPECT_EQ(other.overflowed(), 0U);
+  EXPECT_EQ(usage().bytes, 9 * kKilobyte);
+}
+
+TEST_F(ListsOfUsers, WhatOneUserHasTakesNoOthersMemory) {
+  setBounds(64 * kKilobyte, kNoBound, 16 * kKilobyte);
+  List modest = listOf(accountOf(7));
+  List nobodys;
+  fill(modest, 16);
+  fill(nobodys, 40);
+  std::vector<List> many;
+  for (int i = 0; i < 10; ++i) {
+    many.push_back(listOf(accountOf(8)));
+    fill(many.back(), 4);
+  }
+  EXPECT_EQ(modest.overflowed(), 0U);
+  EXPECT_EQ(nobodys.overflowed(), 0U);
+  EXPECT_LE(usage().bytes, (16 + 16 + 40) * kKilobyte);
+}
+
+TEST_F(ListsOfUsers, WhenAllIsTooMuchTheUserWithMostGivesWay) {
+  setBounds(64 * kKilobyte, 20 * kKilobyte);
+  const auto account = accountOf(7);
+  List first = listOf(account);
+  List second = listOf(account);
+  List large = listOf(accountOf(8));
+  fill(first, 6);
+  fill(second, 6);
+  fill(large, 8);
+  EXPECT_EQ(platform_.overflow.writesTried(), 0U);
+  fill(large, 1, 8);
+  EXPECT_EQ(large.overflowed(), 0U);
+  EXPECT_EQ(first.overflowed() + second.overflowed(), 6U);
+}
+
+TEST_F(ListsOfUsers, WhoHasMostButNothingToGiveLeavesItToOthers) {
+  setBounds(64 * kKilobyte, 20 * kKilobyte);
+  List large = listOf(accountOf(7));
+  List other = listOf(accountOf(8));
+  fill(large, 12);
+  fill(other, 8);
+  {
+    const auto pinned = large.begin();  // a walk goes on
+    fill(other, 1, 8);
+  }
+  EXPECT_EQ(large.overflowed(), 0U);
+  EXPECT_GT(other.overflowed(), 0U);
+}
+
+TEST_F(ListsOfUsers, ListThatChangesItsUserTakesItsMemoryAlong) {
+  setBounds(64 * kKilobyte, kNoBound, 16 * kKilobyte);
+  List list = listOf(accountOf(7));
+  fill(list, 12);
+  List rest = listOf(accountOf(7));
+  list.setAccount(accountOf(8));
+  fill(rest, 12);
+  EXPECT_EQ(platform_.overflow.writesTried(), 0U);
+  fill(list, 5, 12);
+  EXPECT_EQ(list.overflowed(), 8U);
+  EXPECT_EQ(rest.overflowed(), 0U);
+}
+
+TEST_F(ListsOfUsers, UserWhoComesBackBeginsWithNothing) {
+  setBounds(64 * kKilobyte, kNoBound, 16 * kKilobyte);
+  for (std::uint32_t user = 0; user < 200; ++user) {
+    List list = listOf(accountOf(user % 100));
+    fill(list, 16);
+  }
+  EXPECT_EQ(platform_.overflow.writesTried(), 0U);
+  EXPECT_EQ(usage().bytes, 0U);
+}
+
 // Whoever gives way is at least half as large as the largest, whatever became of the lists before.
 TEST_F(ListMemory, LargeListsGiveWayInAnyLife) {
   for (const std::uint64_t seed : testSeeds(1)) {

@@ -55,8 +55,8 @@ class MessageListFixture : public ::testing::Test {
 class KilobyteLists : public MessageListFixture {
  protected:
   // Other bounds from now on, for lists that are made from now on.
-  void setBounds(std::size_t ofSession, std::size_t inAll) {
-    platform_.overflow.setBounds(ofSession, inAll);
+  void setBounds(std::size_t ofSession, std::size_t inAll, std::size_t ofUser = kNoBound) {
+    platform_.overflow.setBounds(ofSession, inAll, ofUser);
     platform_.facilities().overflow = &store_;
     TarnReportingInstallFacilities(&platform_.facilities());
     List shape;

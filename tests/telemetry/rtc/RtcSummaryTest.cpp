@@ -6,6 +6,7 @@
 
 #include "telemetry/rtc/TarnReportingRtcMirror.h"
 #include "telemetry/rtc/TarnReportingRtcSummary.h"
+#include "tests/support/HeapUse.h"
 #include "tests/support/Seeds.h"
 #include "tests/telemetry/rtc/RtcFixture.h"
 
@@ -18,6 +19,16 @@ constexpr std::string_view kSummaryEvent = "Tarn_Session_Summary_Event";
 
 class RtcSummary : public RtcFixture {
  protected:
+  // As the worker takes them from a log.
+  static TarnReportingRtcMessages logged(const std::vector<std::shared_ptr<TarnReportingSessionMessage>>& messages) {
+    TarnReportingRtcMessages stopped;
+    for (const auto& message : messages) {
+      if (TarnReportingIsForRtcSummary(*message)) {
+        stopped.payloads.push_back(message->message());
+      }
+    }
+    return stopped;
+  }
   // What the service got at the stop of this session.
   RtcMessage summaryOf(TarnReportingSession& session) {
     session.stop();
@@ -211,19 +222,35 @@ TEST_F(RtcSummary, IsCutAtItsLimitBetweenTwoMessages) {
     messages.push_back(message({{"a", "xxxxx"}, {"b", n}}));
     messages.back()->setIsSessionStarted(true);
   }
-  const auto whole = TarnReportingMakeRtcSummary(AudioServiceType::Generic, {{}, messages});
+  const auto whole = TarnReportingMakeRtcSummary(AudioServiceType::Generic, logged(messages));
   EXPECT_TRUE(whole.complete);
   EXPECT_EQ(whole.payload["b"].text(), "0,1,2,3");
   // The keys are 28 bytes, "0" and "xxxxx" and "0" seven more, ",xxxxx" and ",1" another eight.
-  const auto cut = TarnReportingMakeRtcSummary(AudioServiceType::Generic, {{}, messages}, 43);
+  const auto cut = TarnReportingMakeRtcSummary(AudioServiceType::Generic, logged(messages), 43);
   EXPECT_FALSE(cut.complete);
   EXPECT_EQ(cut.payload["a"].text(), "xxxxx,xxxxx");
   EXPECT_EQ(cut.payload["b"].text(), "0,1");
-  EXPECT_EQ(TarnReportingMakeRtcSummary(AudioServiceType::Generic, {{}, messages}, 44).payload["b"].text(), "0,1,2");
+  EXPECT_EQ(TarnReportingMakeRtcSummary(AudioServiceType::Generic, logged(messages), 44).payload["b"].text(), "0,1,2");
 }
 
-TEST_F(RtcSummary, LimitLeavesRoomBelowTheLongestTextOfTheService) {
-  EXPECT_EQ(TarnReportingRtcSummary::kLongestText, 134'217'728U);
+TEST_F(RtcSummary, LimitLeavesRoomForTheCopiesOnTheWayToTheDisk) {
+  EXPECT_EQ(TarnReportingRtcSummary::kLongestText, 8'388'608U);
+}
+
+// A session that ran for long waits for its summary on a queue of its own, beside others that stop.
+TEST_F(RtcSummary, WhatWaitsForItsQueueIsAPointerAMessage) {
+  constexpr std::ptrdiff_t kMessages = 20'000;
+  platform_.log.setThreshold(LogLevel::Error);
+  const auto session = startSession();
+  for (int n = 0; n < kMessages; ++n) {
+    session->sendMessage(message({{"n", n}}));
+  }
+  platform_.runUntilIdle();
+  const HeapGrowth heap;
+  TarnReportingSessionRtcWorker worker(session, std::make_shared<TarnReportingRtcMirror>(platform_.rtcReporting));
+  worker.stop();
+  EXPECT_LT(heap.bytes(), 2 * kMessages * static_cast<std::ptrdiff_t>(sizeof(plist::Dictionary)));
+  platform_.runUntilIdle();
 }
 
 TEST_F(RtcSummary, CutSummaryIsLoggedWithTheSession) {
@@ -246,7 +273,7 @@ TEST_F(RtcSummary, KeysCountTowardsTheLimit) {
     messages.push_back(message({{key, ""}}));
     messages.back()->setIsSessionStarted(true);
   }
-  const auto cut = TarnReportingMakeRtcSummary(AudioServiceType::Generic, {{}, messages}, 50);
+  const auto cut = TarnReportingMakeRtcSummary(AudioServiceType::Generic, logged(messages), 50);
   EXPECT_FALSE(cut.complete);
   EXPECT_EQ(cut.payload.size(), 3U);  // with the event's own
 }
@@ -289,7 +316,7 @@ TEST_F(RtcSummary, IsWhatAnObviousModelSaysOfRandomMessages) {
         }
         expected.set(plist::Key(key), joined);
       }
-      const auto summary = TarnReportingMakeRtcSummary(type, {{}, messages});
+      const auto summary = TarnReportingMakeRtcSummary(type, logged(messages));
       ASSERT_TRUE(summary.complete);
       ASSERT_EQ(summary.payload, expected) << plist::description(summary.payload);
     }
