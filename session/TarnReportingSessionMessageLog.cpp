@@ -32,20 +32,20 @@ void TarnReportingSessionMessageLog::sort() {
   try {
     if (!messages_.sort()) return;
   } catch (...) {  // for want of memory; records that are pointed to may be gone
-    newest_.clear();
-    kept_ = 0;
+    forgetPlaces();
     throw;
   }
-  forgetKept();
-  for (auto& [kind, newest] : newest_) {
-    newest = {};
-  }
+  forgetPlaces();
   // What is still missing at the end lay in pages that are lost.
+  std::size_t missing = newest_.size();
   const auto isMissing = [&](TarnReportingSessionMessage::Kind kind) { return newest_[kind].index == kNone; };
   messages_.goBack(isMissing, [&](std::size_t index, const Record& record) {
-    if (isMissing(record->kind())) {
-      newest_[record->kind()] = {index, record.get(), nullptr};
+    Newest& newest = newest_[record->kind()];
+    if (newest.index == kNone) {
+      newest = {index, record.get(), nullptr};
+      --missing;
     }
+    return missing > 0;
   });
 }
 
@@ -74,6 +74,14 @@ const TarnReportingSessionMessage* TarnReportingSessionMessageLog::newest(AudioE
     ++kept_;
   }
   return looked_.get();
+}
+
+// The kinds stay: each that the log has is known.
+void TarnReportingSessionMessageLog::forgetPlaces() noexcept {
+  for (auto& [kind, newest] : newest_) {
+    newest = {};
+  }
+  kept_ = 0;
 }
 
 void TarnReportingSessionMessageLog::forgetKept() const {
