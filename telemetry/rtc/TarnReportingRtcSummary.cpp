@@ -1,7 +1,6 @@
 #include "telemetry/rtc/TarnReportingRtcSummary.h"
 
 #include <algorithm>
-#include <deque>
 #include <string>
 #include <string_view>
 #include <unordered_map>
@@ -63,11 +62,11 @@ TarnReportingRtcSummary TarnReportingMakeRtcSummary(AudioServiceType serviceType
   TarnReportingRtcSummary summary;
   Table table;
   table.append(kSummaryEvent, static_cast<unsigned>(serviceType));
-  const auto take = [&](const std::shared_ptr<TarnReportingSessionMessage>& message) {
-    if (message->isRedundant() || !message->isSessionStarted()) return;
+  const auto take = [&](const TarnReportingSessionMessage& message) {
+    if (message.isRedundant() || !message.isSessionStarted()) return;
     summary.complete = summary.complete && table.bytes() < longestText;
     if (!summary.complete) return;
-    for (const plist::Dictionary::Entry& entry : message->message()) {
+    for (const plist::Dictionary::Entry& entry : message.message()) {
       table.append(entry.key, entry.value);
     }
   };
@@ -75,7 +74,7 @@ TarnReportingRtcSummary TarnReportingMakeRtcSummary(AudioServiceType serviceType
     if (!summary.complete) break;
     for (const auto& message : page->read()) {
       if (TarnReportingIsAddressedToRtc(*message)) {
-        take(message);
+        take(*message);
       }
     }
   }

@@ -9,6 +9,7 @@
 #pragma once
 
 #include <cstddef>
+#include <deque>
 #include <memory>
 #include <vector>
 
@@ -34,10 +35,11 @@ struct TarnReportingRtcSummary {
 bool TarnReportingIsAddressedToRtc(const TarnReportingSessionMessage& message);
 
 // The messages of a session that was stopped: those of the pages, of which not all need be for the worker, then the
-// others, which are. A page is read when its messages are added, one after the other.
+// others, which are. A page is read when its messages are added, one after the other. The others lie here by value: the
+// copies are made while the session stops, and let go of on another thread.
 struct TarnReportingRtcMessages {
   std::vector<std::shared_ptr<const TarnReportingSessionMessagePage>> pages;
-  std::vector<std::shared_ptr<TarnReportingSessionMessage>> messages;
+  std::deque<TarnReportingSessionMessage> messages;
 };
 
 // Redundant messages and those that came while the session was not started are left out. A page that can't be read back

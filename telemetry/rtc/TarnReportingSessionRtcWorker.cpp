@@ -22,12 +22,10 @@ TarnReportingRtcMirror::Stopped snapshotOf(const TarnReportingSession& session) 
   const TarnReportingSessionMessageList& log = session.messages();
   TarnReportingRtcMirror::Stopped stopped{{}, !log.empty(), session.serviceType(), session.reporterID()};
   stopped.messages.pages = log.pages();
-  std::vector<std::shared_ptr<TarnReportingSessionMessage>>& copies = stopped.messages.messages;
-  copies.reserve(log.recent().size());
   for (const auto& message : log.recent()) {
-    auto copy = message->copyWithZone();
-    if (TarnReportingIsAddressedToRtc(*message)) {
-      copies.push_back(std::move(copy));
+    stopped.messages.messages.emplace_back(TarnReportingSessionMessage::Copy{}, *message);
+    if (!TarnReportingIsAddressedToRtc(*message)) {
+      stopped.messages.messages.pop_back();
     }
   }
   return stopped;

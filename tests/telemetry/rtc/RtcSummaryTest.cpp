@@ -28,6 +28,11 @@ class RtcSummary : public RtcFixture {
   std::string valueOf(TarnReportingSession& session, const char* key) {
     return summaryOf(session).payload[key].asText();
   }
+  static TarnReportingSessionMessage& addStarted(TarnReportingRtcMessages& stopped, const plist::Dictionary& payload) {
+    auto& added = stopped.messages.emplace_back(payload, AudioEventCategory::Playback, AudioEventType::State);
+    added.setIsSessionStarted(true);
+    return added;
+  }
 };
 
 TEST_F(RtcSummary, JoinsTheValuesOfAKeyInMessageOrder) {
@@ -206,20 +211,19 @@ TEST_F(RtcSummary, EveryRecordOfTheLogIsCopiedAndNoneIsChanged) {
 }
 
 TEST_F(RtcSummary, IsCutAtItsLimitBetweenTwoMessages) {
-  std::vector<std::shared_ptr<TarnReportingSessionMessage>> messages;
+  TarnReportingRtcMessages stopped;
   for (int n = 0; n < 4; ++n) {
-    messages.push_back(message({{"a", "xxxxx"}, {"b", n}}));
-    messages.back()->setIsSessionStarted(true);
+    addStarted(stopped, {{"a", "xxxxx"}, {"b", n}});
   }
-  const auto whole = TarnReportingMakeRtcSummary(AudioServiceType::Generic, {{}, messages});
+  const auto whole = TarnReportingMakeRtcSummary(AudioServiceType::Generic, stopped);
   EXPECT_TRUE(whole.complete);
   EXPECT_EQ(whole.payload["b"].text(), "0,1,2,3");
   // The keys are 28 bytes, "0" and "xxxxx" and "0" seven more, ",xxxxx" and ",1" another eight.
-  const auto cut = TarnReportingMakeRtcSummary(AudioServiceType::Generic, {{}, messages}, 43);
+  const auto cut = TarnReportingMakeRtcSummary(AudioServiceType::Generic, stopped, 43);
   EXPECT_FALSE(cut.complete);
   EXPECT_EQ(cut.payload["a"].text(), "xxxxx,xxxxx");
   EXPECT_EQ(cut.payload["b"].text(), "0,1");
-  EXPECT_EQ(TarnReportingMakeRtcSummary(AudioServiceType::Generic, {{}, messages}, 44).payload["b"].text(), "0,1,2");
+  EXPECT_EQ(TarnReportingMakeRtcSummary(AudioServiceType::Generic, stopped, 44).payload["b"].text(), "0,1,2");
 }
 
 TEST_F(RtcSummary, LimitLeavesRoomBelowTheLongestTextOfTheService) {
@@ -241,12 +245,11 @@ TEST_F(RtcSummary, CutSummaryIsLoggedWithTheSession) {
 }
 
 TEST_F(RtcSummary, KeysCountTowardsTheLimit) {
-  std::vector<std::shared_ptr<TarnReportingSessionMessage>> messages;
+  TarnReportingRtcMessages stopped;
   for (const char* const key : {"key number 1", "key number 2", "key number 3"}) {
-    messages.push_back(message({{key, ""}}));
-    messages.back()->setIsSessionStarted(true);
+    addStarted(stopped, {{key, ""}});
   }
-  const auto cut = TarnReportingMakeRtcSummary(AudioServiceType::Generic, {{}, messages}, 50);
+  const auto cut = TarnReportingMakeRtcSummary(AudioServiceType::Generic, stopped, 50);
   EXPECT_FALSE(cut.complete);
   EXPECT_EQ(cut.payload.size(), 3U);  // with the event's own
 }
@@ -262,7 +265,7 @@ TEST_F(RtcSummary, IsWhatAnObviousModelSaysOfRandomMessages) {
     const plist::Value values[] = {1, "1", 2.5F, true, "a,b", "", plist::Array{}, plist::Date{1}};
     for (int round = 0; round < 200; ++round) {
       const auto type = AudioServiceType{static_cast<std::uint16_t>(below(11))};
-      std::vector<std::shared_ptr<TarnReportingSessionMessage>> messages;
+      TarnReportingRtcMessages stopped;
       std::map<std::string, std::vector<std::string>> lists;
       lists[std::string(kSummaryEvent)] = {std::to_string(static_cast<unsigned>(type))};
       for (unsigned count = below(30); count > 0; --count) {
@@ -270,11 +273,10 @@ TEST_F(RtcSummary, IsWhatAnObviousModelSaysOfRandomMessages) {
         for (unsigned entries = below(6); entries > 0; --entries) {
           payload.set(names[below(6)], values[below(8)]);
         }
-        const auto each = message(payload);
-        each->setIsRedundant(below(4) == 0);
-        each->setIsSessionStarted(below(4) != 0);
-        messages.push_back(each);
-        if (each->isRedundant() || !each->isSessionStarted()) continue;
+        TarnReportingSessionMessage& each = addStarted(stopped, payload);
+        each.setIsRedundant(below(4) == 0);
+        each.setIsSessionStarted(below(4) != 0);
+        if (each.isRedundant() || !each.isSessionStarted()) continue;
         for (const char* name : names) {
           if (payload.contains(name)) {
             lists[name].push_back(payload[name].asText());
@@ -289,7 +291,7 @@ TEST_F(RtcSummary, IsWhatAnObviousModelSaysOfRandomMessages) {
         }
         expected.set(plist::Key(key), joined);
       }
-      const auto summary = TarnReportingMakeRtcSummary(type, {{}, messages});
+      const auto summary = TarnReportingMakeRtcSummary(type, stopped);
       ASSERT_TRUE(summary.complete);
       ASSERT_EQ(summary.payload, expected) << plist::description(summary.payload);
     }
