@@ -28,14 +28,13 @@ namespace tarn {
 template <class IsLeftOut, class Walk>
 TarnReportingSessionMessageList TarnReportingDerivedMessages(const TarnReportingSessionMessageList& messages,
                                                              IsLeftOut isLeftOut, Walk&& walk) {
-  for (auto at = messages.begin(); at != messages.end(); ++at) {
-    if (at.beginsPage()) {
-      walk.keep();
-    }
-    if (!isLeftOut(at.index())) {
-      walk.take((*at)->message());
-    }
-  }
+  messages.forEach(
+      [&](std::size_t index, const TarnReportingSessionMessageList::Record& record) {
+        if (!isLeftOut(index)) {
+          walk.take(record->message());
+        }
+      },
+      [&] { walk.keep(); });
   return walk.finish();
 }
 // All messages.

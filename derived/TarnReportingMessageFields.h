@@ -11,6 +11,7 @@
 #include <algorithm>
 #include <array>
 #include <cstddef>
+#include <span>
 #include <utility>
 #include <vector>
 
@@ -21,6 +22,9 @@
 #include "plist/ValueView.h"
 
 namespace tarn {
+
+template <class Field>
+class TarnReportingMessageFieldReader;
 
 // A look at a handful of values: it is copied cheaply and owns nothing, apart from what keepIn() was given to hold.
 template <class Field>
@@ -62,6 +66,8 @@ class TarnReportingMessageFields {
   }
 
  private:
+  friend class TarnReportingMessageFieldReader<Field>;
+
   std::array<plist::ValueView, kCount> values_;
 };
 
@@ -82,22 +88,15 @@ class TarnReportingMessageFieldReader {
   // The fields look into the payload.
   Fields read(const plist::Dictionary& payload) {
     Fields fields;
-    auto entry = payload.begin();
-    for (const std::size_t field : placesIn(payload)) {
-      if (field != Fields::kCount) {
-        fields[static_cast<Field>(field)] = (*entry).value;
-      }
-      ++entry;
-    }
+    payload.pick(picksOf(payload), fields.values_);
     return fields;
   }
 
  private:
-  // The field at each place of a key list, Count for none, up to the last place that has one.
-  using Places = std::vector<std::size_t>;
+  // Where the fields of a key list lie, those that it has.
   struct Shape {
     plist::KeyList keys;
-    Places places;
+    std::vector<plist::Dictionary::Pick> picks;
   };
 
   // More shapes than a session's messages usually have. Two that share a slot push each other out and cost a pass over
@@ -105,19 +104,21 @@ class TarnReportingMessageFieldReader {
   static constexpr std::size_t kSlots = 128;
 
   // Compares the whole key list, as two lists may have the same hash.
-  const Places& placesIn(const plist::Dictionary& payload) {
+  std::span<const plist::Dictionary::Pick> picksOf(const plist::Dictionary& payload) {
     Shape& slot = slots_[payload.keysHash() % kSlots];
     if (!payload.hasKeys(slot.keys)) {
       slot = {payload.keys(), {}};
+      std::size_t skipped = 0;
       for (std::size_t place = 0; place < slot.keys.size(); ++place) {
         const auto field = std::find(keys_.begin(), keys_.end(), slot.keys[place]);
-        if (field != keys_.end()) {
-          slot.places.resize(place, Fields::kCount);
-          slot.places.push_back(static_cast<std::size_t>(field - keys_.begin()));
+        if (field == keys_.end()) {
+          ++skipped;
+        } else {
+          slot.picks.push_back({std::exchange(skipped, 0), static_cast<std::size_t>(field - keys_.begin())});
         }
       }
     }
-    return slot.places;
+    return slot.picks;
   }
 
   const typename Fields::Keys& keys_;

@@ -181,6 +181,18 @@ bool Dictionary::contains(std::string_view key) const noexcept {
   return body_ != nullptr && detail::indexInKeyList(body_->keys, key) != KeyList::npos;
 }
 
+void Dictionary::pick(std::span<const Pick> picks, std::span<ValueView> slots) const noexcept {
+  if (picks.empty()) return;
+  const std::byte* at = body_->data();
+  for (const Pick& pick : picks) {
+    for (std::size_t left = pick.skipped; left > 0; --left) {
+      at += Packed::sizeAt(at);
+    }
+    slots[pick.slot] = Packed::read(at);
+    at += Packed::sizeAt(at);
+  }
+}
+
 // Replaces `removed` bytes at `offset` by the packed value. A block that is shared is copied; a container that goes is
 // released, one that comes is held already.
 static Body* splice(Body* body, std::size_t offset, std::size_t removed, std::span<const std::byte> packed) {

@@ -119,6 +119,16 @@ class Dictionary {
   bool contains(std::string_view key) const noexcept;
   bool contains(const char* key) const noexcept { return contains(std::string_view(key)); }
 
+  // An entry that a pass over the values stops at: so many entries after the one before it, and the slot that gets its
+  // value.
+  struct Pick {
+    std::size_t skipped;
+    std::size_t slot;
+  };
+  // Reads these values in one pass, for who goes through many dictionaries of known shapes. The entries exist: the
+  // picks were made of the very key list that this has. The views end as those of get() do; slots without a pick stay.
+  void pick(std::span<const Pick> picks, std::span<ValueView> slots) const noexcept;
+
   // Stores a value: in the place that the key has, else after all others. An absent value is not stored. `value` may
   // look into this very dictionary. It moves what lies after the value; a shared block is copied first.
   void set(const Key& key, const ValueView& value);

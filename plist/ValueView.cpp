@@ -181,6 +181,7 @@ std::uint64_t ValueView::asUInt64() const noexcept {
 }
 
 bool ValueView::asBool() const noexcept {
+  if (kind_ == Kind::Bool || kind_ == Kind::Signed) return signed_ != 0;  // nearly always, and no number is lost
   return asDouble() != 0;
 }
 

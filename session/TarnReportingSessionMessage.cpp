@@ -15,6 +15,13 @@ constexpr TarnReportingLogger kLog{TarnReportingSessionCategory, "TarnReportingS
 
 }  // namespace
 
+TarnReportingSessionMessage::TarnReportingSessionMessage(Copy, const TarnReportingSessionMessage& original)
+    : TarnReportingSessionMessage(original.message_, original.category_, original.type_) {
+  kLog(LogLevel::Debug, "copyWithZone");
+  isRedundant_ = original.isRedundant_;
+  isSessionStarted_ = original.isSessionStarted_;
+}
+
 const TarnReportingSessionMessage::DestinationWorkers& TarnReportingSessionMessage::destinationWorkers()
     const noexcept {
   static const DestinationWorkers kEveryone;
@@ -34,11 +41,7 @@ std::string TarnReportingSessionMessage::description() const {
 }
 
 std::shared_ptr<TarnReportingSessionMessage> TarnReportingSessionMessage::copyWithZone() const {
-  kLog(LogLevel::Debug, "copyWithZone");
-  auto copy = std::make_shared<TarnReportingSessionMessage>(message_, category_, type_);
-  copy->isRedundant_ = isRedundant_;
-  copy->isSessionStarted_ = isSessionStarted_;
-  return copy;
+  return std::make_shared<TarnReportingSessionMessage>(Copy{}, *this);
 }
 
 double TarnReportingSessionMessage::sortingTime() const noexcept {
@@ -46,14 +49,14 @@ double TarnReportingSessionMessage::sortingTime() const noexcept {
   return std::isnan(time) ? 0 : time;  // a stamp that is no number would leave no order at all
 }
 
-void TarnReportingSessionMessage::sortMessages(TarnReportingSessionMessages& messages) {
+bool TarnReportingSessionMessage::sortMessages(TarnReportingSessionMessages& messages) {
   // Clients nearly always send in time order: look before doing anything, and read each stamp once.
   std::vector<double> times;
   times.reserve(messages.size());
   for (const auto& message : messages) {
     times.push_back(message->sortingTime());
   }
-  if (std::is_sorted(times.begin(), times.end())) return;
+  if (std::is_sorted(times.begin(), times.end())) return false;
   std::vector<std::uint32_t> order(messages.size());
   std::iota(order.begin(), order.end(), 0U);
   std::stable_sort(order.begin(), order.end(),
@@ -62,6 +65,7 @@ void TarnReportingSessionMessage::sortMessages(TarnReportingSessionMessages& mes
   std::transform(order.begin(), order.end(), sorted.begin(),
                  [&](std::uint32_t index) { return std::move(messages[index]); });
   messages.swap(sorted);
+  return true;
 }
 
 void TarnReportingSessionMessage::lock() const noexcept {

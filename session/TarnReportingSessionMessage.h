@@ -37,6 +37,9 @@ class TARN_CAPABILITY TarnReportingSessionMessage {
   // Shares the payload with the caller until one of the two writes to it.
   TarnReportingSessionMessage(plist::Dictionary message, AudioEventCategory category, AudioEventType type)
       : message_(std::move(message)), category_(category), type_(type) {}
+  // For who keeps many copies and needs no pointers to them; what it is: see copyWithZone().
+  struct Copy {};
+  TarnReportingSessionMessage(Copy, const TarnReportingSessionMessage& original);
   TarnReportingSessionMessage(const TarnReportingSessionMessage&) = delete;
   TarnReportingSessionMessage& operator=(const TarnReportingSessionMessage&) = delete;
 
@@ -75,8 +78,8 @@ class TARN_CAPABILITY TarnReportingSessionMessage {
   // What records are sorted by: the time stamp, 0 when it is missing or no number.
   double sortingTime() const noexcept;
   // Sorts in place and stably by epoch time; records without a time stamp count as 0. One look when they are in order
-  // already, which is the rule. Without the memory for it nothing has changed.
-  static void sortMessages(TarnReportingSessionMessages& messages);
+  // already, which is the rule; false then. Without the memory for it nothing has changed.
+  static bool sortMessages(TarnReportingSessionMessages& messages);
 
   // The record's own guard (BasicLockable), for changes to a record that a worker may still hold. A flag and not a
   // mutex, since there may be millions of records. It isn't recursive.

@@ -114,6 +114,33 @@ TarnReportingSessionMessageList::Record TarnReportingSessionMessageList::operato
   return look(index);
 }
 
+TarnReportingSessionMessageList::Iterator TarnReportingSessionMessageList::begin() const {
+  return Iterator(*this);
+}
+
+void TarnReportingSessionMessageList::Iterator::skipLost() {
+  while (index_ < list_.overflowed_) {
+    const std::size_t part = list_.partOf(index_);
+    if (!list_.open(part).records.empty()) break;
+    index_ = list_.parts_[part].first + list_.parts_[part].page->size();
+  }
+}
+
+void TarnReportingSessionMessageList::goBack(const std::function<bool(TarnReportingSessionMessage::Kind)>& wants,
+                                             const std::function<bool(std::size_t, const Record&)>& take) const {
+  std::size_t index = size();
+  for (auto record = recent().rbegin(); record != recent().rend(); ++record) {
+    if (!take(--index, *record)) return;
+  }
+  for (std::size_t part = parts_.size(); part > 0; --part) {
+    if (!parts_[part - 1].page->contents().mayHave(wants)) continue;
+    const Opened& opened = open(part - 1);
+    for (index = opened.records.size(); index > 0; --index) {
+      if (!take(opened.first + index - 1, opened.records[index - 1])) return;
+    }
+  }
+}
+
 std::vector<std::shared_ptr<const TarnReportingSessionMessagePage>> TarnReportingSessionMessageList::pages() const {
   for (Opened& opened : opened_) {
     closePart(opened);

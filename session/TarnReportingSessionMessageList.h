@@ -17,6 +17,7 @@
 #include <array>
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <iterator>
 #include <memory>
 #include <optional>
@@ -76,6 +77,12 @@ class TarnReportingSessionMessageList {
   Iterator begin() const;
   std::default_sentinel_t end() const noexcept { return {}; }
 
+  // Goes through all records that can be read: take(index, record). beginPage() comes before the first record of each
+  // page and of those in memory behind pages: what was shown of the page before goes. What is in memory takes a plain
+  // loop, so nothing may be appended to this list meanwhile.
+  template <class Take, class BeginPage>
+  void forEach(Take take, BeginPage beginPage) const;
+
   // Lets `apply(record)` change a record in place. Nothing happens when the record can't be read back. The page is
   // written anew when it is left; when there is no room for it, it stays in memory.
   template <class Apply>
@@ -87,10 +94,10 @@ class TarnReportingSessionMessageList {
       noteChange(index);
     }
   }
-  // Calls take(index, record) from the last record to the first. Pages of which wants(kind) is true for none of the
-  // kinds are passed over.
-  template <class Wants, class Take>
-  void goBack(const Wants& wants, Take take) const;
+  // Calls take(index, record) from the last record to the first, for as long as it returns true. Pages of which
+  // wants(kind) is true for none of the kinds are passed over.
+  void goBack(const std::function<bool(TarnReportingSessionMessage::Kind)>& wants,
+              const std::function<bool(std::size_t, const Record&)>& take) const;
   // How often records of pages were changed in place. Who keeps a record that was read back looks here whether it may
   // be stale.
   std::uint64_t changes() const noexcept { return changes_; }
@@ -187,19 +194,15 @@ class TarnReportingSessionMessageList::Iterator {
   const Record& operator*() const { return list_.look(index_); }
   const Record* operator->() const { return &list_.look(index_); }
   Iterator& operator++() {
-    ++index_;
-    skipLost();
+    if (++index_ < list_.overflowed_) {
+      skipLost();
+    }
     return *this;
   }
   friend bool operator==(const Iterator& at, std::default_sentinel_t) { return at.index_ >= at.list_.size(); }
 
   // The record's place in the list.
   std::size_t index() const noexcept { return index_; }
-  // Whether the record is the first of its page, or the first behind the pages: what was shown of the page before goes.
-  bool beginsPage() const noexcept {
-    return index_ <= list_.overflowed_ &&
-           (index_ == list_.overflowed_ || list_.parts_[list_.partOf(index_)].first == index_);
-  }
 
  private:
   friend class TarnReportingSessionMessageList;
@@ -208,34 +211,28 @@ class TarnReportingSessionMessageList::Iterator {
     ++list_.pins_;
   }
   // Goes past the pages that can't be read back.
-  void skipLost() {
-    while (index_ < list_.overflowed_) {
-      const std::size_t part = list_.partOf(index_);
-      if (!list_.open(part).records.empty()) break;
-      index_ = list_.parts_[part].first + list_.parts_[part].page->size();
-    }
-  }
+  void skipLost();
 
   const TarnReportingSessionMessageList& list_;
   std::size_t index_ = 0;
 };
 
-template <class Wants, class Take>
-void TarnReportingSessionMessageList::goBack(const Wants& wants, Take take) const {
-  for (std::size_t index = size(); index > overflowed_; --index) {
-    take(index - 1, (*recent_)[index - 1 - overflowed_]);
-  }
-  for (std::size_t part = parts_.size(); part > 0; --part) {
-    if (!parts_[part - 1].page->contents().mayHave(wants)) continue;
-    const Opened& opened = open(part - 1);
-    for (std::size_t index = opened.records.size(); index > 0; --index) {
-      take(opened.first + index - 1, opened.records[index - 1]);
+template <class Take, class BeginPage>
+void TarnReportingSessionMessageList::forEach(Take take, BeginPage beginPage) const {
+  Iterator at(*this);  // keeps all in its place to the end
+  for (; at.index() < overflowed_; ++at) {
+    if (parts_[partOf(at.index())].first == at.index()) {
+      beginPage();
     }
+    take(at.index(), *at);
   }
-}
-
-inline TarnReportingSessionMessageList::Iterator TarnReportingSessionMessageList::begin() const {
-  return Iterator(*this);
+  std::size_t index = overflowed_;
+  if (index > 0) {
+    beginPage();
+  }
+  for (const Record& record : recent()) {
+    take(index++, record);
+  }
 }
 
 inline const TarnReportingSessionMessageList::Record& TarnReportingSessionMessageList::look(std::size_t index) const {

@@ -50,20 +50,20 @@ void TarnReportingSessionMessageLog::sort() {
   try {
     if (!body_->messages.sort()) return;
   } catch (...) {  // for want of memory; records that are pointed to may be gone
-    newest.clear();
-    body_->kept = 0;
+    body_->forgetPlaces();
     throw;
   }
-  body_->forgetKept();
-  for (auto& [kind, ofTheKind] : newest) {
-    ofTheKind = {};
-  }
+  body_->forgetPlaces();
   // What is still missing at the end lay in pages that are lost.
+  std::size_t missing = newest.size();
   const auto isMissing = [&](TarnReportingSessionMessage::Kind kind) { return newest[kind].index == kNone; };
   body_->messages.goBack(isMissing, [&](std::size_t index, const Record& record) {
-    if (isMissing(record->kind())) {
-      newest[record->kind()] = {index, record.get(), nullptr};
+    Newest& ofTheKind = newest[record->kind()];
+    if (ofTheKind.index == kNone) {
+      ofTheKind = {index, record.get(), nullptr};
+      --missing;
     }
+    return missing > 0;
   });
 }
 
@@ -91,6 +91,14 @@ const TarnReportingSessionMessage* TarnReportingSessionMessageLog::newest(AudioE
     ++body.kept;
   }
   return body.looked.get();
+}
+
+// The kinds stay: each that the log has is known.
+void TarnReportingSessionMessageLog::Body::forgetPlaces() noexcept {
+  for (auto& [kind, ofTheKind] : newest) {
+    ofTheKind = {};
+  }
+  kept = 0;
 }
 
 void TarnReportingSessionMessageLog::Body::forgetKept() {

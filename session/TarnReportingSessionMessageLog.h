@@ -31,9 +31,9 @@ class TarnReportingSessionMessageLog {
   void setAccount(std::shared_ptr<TarnReportingSessionLogAccount> account);
   // The record is the newest of its category and type from now on. Without the memory for it nothing has changed.
   void append(Record record);
-  // Sorts by time stamp (TarnReportingSessionMessage::sortMessages). Without a pass over the look-up when nothing
-  // moved. When memory is missing for it, nothing counts as the newest of a kind any more, and of a log with pages
-  // those are gone that weren't merged yet.
+  // Sorts by time stamp (TarnReportingSessionMessage::sortMessages). Costs the look-up nothing when nothing moved, else
+  // a walk back to where the last kind is found. When memory is missing for it, nothing counts as the newest of a kind
+  // any more, and of a log with pages those are gone that weren't merged yet.
   void sort();
   // The log is as new.
   void clear();
@@ -64,7 +64,9 @@ class TarnReportingSessionMessageLog {
     explicit Body(std::int64_t reporterID) : messages(reporterID) {}
     // Replaces what was the newest record of a kind, and lets go of its copy.
     void note(Newest& newest, std::size_t index, const TarnReportingSessionMessage* recent) noexcept;
-    // Lets go of all copies: a sort moved the records, or a producer changed one.
+    // Nothing counts as the newest of a kind any more, until it is looked for again.
+    void forgetPlaces() noexcept;
+    // Lets go of all copies: a producer changed one.
     void forgetKept();
 
     TarnReportingSessionMessageList messages;

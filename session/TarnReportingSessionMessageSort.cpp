@@ -79,10 +79,7 @@ struct TarnReportingSessionMessageList::Run {
 
 bool TarnReportingSessionMessageList::sort() {
   if (empty()) return false;
-  if (parts_.empty()) {
-    TarnReportingSessionMessage::sortMessages(*recent_);
-    return true;
-  }
+  if (parts_.empty()) return TarnReportingSessionMessage::sortMessages(*recent_);
   if (isSorted()) return false;
   sortPages();
   return true;

@@ -24,12 +24,11 @@ TarnReportingCombinedMessages TarnReportingSessionWorkerUtility::combineRapidMes
     double time;
   };
   std::optional<Head> head;
-  for (auto at = messages.begin(); at != messages.end(); ++at) {
-    const std::shared_ptr<TarnReportingSessionMessage>& message = *at;
+  const auto take = [&](std::size_t index, const TarnReportingSessionMessageList::Record& message) {
     const plist::Dictionary& payload = message->message();
     const auto key = std::find_if(keysToCombine.begin(), keysToCombine.end(),
                                   [&](const plist::Key& each) { return payload.contains(each); });
-    if (key == keysToCombine.end()) continue;
+    if (key == keysToCombine.end()) return;
     const auto place = static_cast<std::size_t>(key - keysToCombine.begin());
     if (seen[place]) {
       seen.assign(seen.size(), false);
@@ -38,7 +37,7 @@ TarnReportingCombinedMessages TarnReportingSessionWorkerUtility::combineRapidMes
     seen[place] = true;
     const plist::ValueView time = payload.get(keys::kTimestamp);
     if (!head) {
-      head = {at.index(), time.asDouble()};
+      head = {index, time.asDouble()};
     } else if (time.asDouble() - head->time < maximumPausetime) {
       // Its own count: the page that it lies in may go when the head's is read.
       const plist::Dictionary merged = payload;
@@ -47,9 +46,10 @@ TarnReportingCombinedMessages TarnReportingSessionWorkerUtility::combineRapidMes
         const MutexLock guard(record);
         record.mutableMessage().merge(merged);
       });
-      combined.setMerged(at.index());
+      combined.setMerged(index);
     }
-  }
+  };
+  messages.forEach(take, [] {});
   return combined;
 }
 

@@ -25,9 +25,9 @@ TarnReportingRtcMirror::Stopped snapshotOf(const TarnReportingSession& session) 
   std::vector<plist::Dictionary>& payloads = stopped.messages.payloads;
   payloads.reserve(log.recent().size());
   for (const auto& message : log.recent()) {
-    const auto copy = message->copyWithZone();
+    const TarnReportingSessionMessage copy(TarnReportingSessionMessage::Copy{}, *message);
     if (TarnReportingIsForRtcSummary(*message)) {
-      payloads.push_back(std::move(copy->mutableMessage()));
+      payloads.push_back(copy.message());
     }
   }
   return stopped;

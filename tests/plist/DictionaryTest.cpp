@@ -30,6 +30,24 @@ TEST(Dictionary, EmptyHoldsNothing) {
   EXPECT_EQ(empty.storageBytes(), 0U);
 }
 
+TEST(Dictionary, PicksValuesInOnePass) {
+  const Dictionary dictionary{{"a", 1}, {"b", std::string(300, 'x')}, {"c", 2.5}, {"d", "text"}, {"e", Array{1}}};
+  std::array<ValueView, 4> slots{};
+  slots[1] = 42;
+  const Dictionary::Pick picks[] = {{0, 2}, {1, 0}, {1, 3}};
+  dictionary.pick(picks, slots);
+  EXPECT_EQ(slots[0].doubleValue(), 2.5);
+  EXPECT_EQ(slots[1].signedValue(), 42);
+  EXPECT_EQ(slots[2].signedValue(), 1);
+  EXPECT_EQ(slots[3].array(), Array{1});
+}
+
+TEST(Dictionary, PicksNothingOfAnEmptyOne) {
+  std::array<ValueView, 1> slots{ValueView(7)};
+  Dictionary().pick({}, slots);
+  EXPECT_EQ(slots[0].signedValue(), 7);
+}
+
 TEST(Dictionary, KeepsInsertionOrderAndReplacesInPlace) {
   Dictionary dictionary{{"b", 1}, {"a", "text"}, {"c", 2.5}};
   dictionary.set("a", 700000);

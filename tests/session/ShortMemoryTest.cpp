@@ -130,6 +130,24 @@ TEST_F(LogShortMemory, ASortThatFailsLeavesNoNewestOfAKind) {
   EXPECT_GT(failed, 0);
 }
 
+TEST_F(LogShortMemory, ASortAfterOneThatFailedFindsTheNewestOfEachKind) {
+  TarnReportingSessionMessageLog log(7);
+  const auto append = [&](AudioEventCategory category, double time) {
+    log.append(std::make_shared<TarnReportingSessionMessage>(plist::Dictionary{{"tarnreporting_timestamp", time}},
+                                                             category, AudioEventType::State));
+  };
+  append(AudioEventCategory::Volume, 2);
+  append(AudioEventCategory::Setup, 1);
+  bool threw = false;
+  ASSERT_TRUE(sortWithout(1, log, threw));
+  ASSERT_TRUE(threw);
+  append(AudioEventCategory::Playback, 3);
+  log.sort();
+  for (const auto category : {AudioEventCategory::Volume, AudioEventCategory::Setup, AudioEventCategory::Playback}) {
+    EXPECT_NE(log.newest(category, AudioEventType::State), nullptr) << static_cast<int>(category);
+  }
+}
+
 TEST_F(LogShortMemory, NothingStaysInTheStoreOfAPageThatCouldNotBeMade) {
   const auto counts = std::make_shared<List::Page::Counts>();
   const Record record = made(1);

@@ -121,6 +121,28 @@ TEST_F(KeptKinds, LostMessagesTakeNoRoom) {
   EXPECT_EQ(readsOf(kMostKept, 2 * kMostKept), 0U);
 }
 
+TEST_F(KeptKinds, InMemoryTheNewestOfEachIsFoundAfterASort) {
+  setBounds(kNoBound, kNoBound);
+  TarnReportingSessionMessageLog log(7);
+  log.append(ofKind(0, 0, 1));
+  log.append(ofKind(1, 1, 5));
+  log.append(ofKind(2, 2, 4));
+  log.append(ofKind(1, 3, 3));
+  log.append(ofKind(2, 4, 2));
+  const auto newest = [&](int kind) {
+    return log.newest(static_cast<AudioEventCategory>(kind), AudioEventType::State)->message().get("n").asInt64();
+  };
+  EXPECT_EQ(newest(1), 3);
+  log.sort();
+  EXPECT_EQ(newest(0), 0);
+  EXPECT_EQ(newest(1), 1);
+  EXPECT_EQ(newest(2), 2);
+  log.sort();  // in order by now
+  EXPECT_EQ(newest(0), 0);
+  EXPECT_EQ(newest(1), 1);
+  EXPECT_EQ(newest(2), 2);
+}
+
 TEST_F(KeptKinds, SortOfALogInOrderReadsNothing) {
   addKinds(0, 20);
   log_.sort();

@@ -3,6 +3,7 @@
 
 #include <memory>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "tests/session/log/MessageListFixture.h"
@@ -156,23 +157,60 @@ TEST_F(ListPages, WhatIsShownHoldsOverALostPageToTheNext) {
   EXPECT_TRUE(shown.expired());
 }
 
+// The numbers of the messages, and the places before which a walk told that a page begins.
+struct Walked {
+  explicit Walked(const TarnReportingSessionMessageList& list) {
+    bool begins = false;
+    list.forEach(
+        [&](std::size_t index, const TarnReportingSessionMessageList::Record& record) {
+          numbers.push_back(record->message().get("n").asInt64());
+          places.push_back(index);
+          if (std::exchange(begins, false)) {
+            beginnings.push_back(index);
+          }
+        },
+        [&] { begins = true; });
+  }
+
+  std::vector<std::int64_t> numbers;
+  std::vector<std::size_t> places;
+  std::vector<std::size_t> beginnings;
+};
+
 TEST_F(ListPages, WalkTellsWherePagesBegin) {
-  const auto beginnings = [](const List& list) {
-    std::vector<std::size_t> places;
-    for (auto at = list.begin(); at != list.end(); ++at) {
-      if (at.beginsPage()) {
-        places.push_back(at.index());
-      }
-    }
-    return places;
-  };
   List list;
   fill(list, 22);
   ASSERT_EQ(list.overflowed(), 6U);
-  EXPECT_EQ(beginnings(list), (std::vector<std::size_t>{0, 2, 4, 6}));
-  List inMemory;
-  fill(inMemory, 3);
-  EXPECT_EQ(beginnings(inMemory), (std::vector<std::size_t>{0}));
+  const Walked walked(list);
+  EXPECT_EQ(walked.numbers, upTo(22));
+  EXPECT_EQ(walked.beginnings, (std::vector<std::size_t>{0, 2, 4, 6}));
+}
+
+TEST_F(ListPages, WalkOfMessagesInMemoryTellsOfNoPage) {
+  List list;
+  fill(list, 3);
+  const Walked walked(list);
+  EXPECT_EQ(walked.numbers, upTo(3));
+  EXPECT_EQ(walked.beginnings, std::vector<std::size_t>{});
+}
+
+TEST_F(ListPages, WalkPassesOverALostPage) {
+  List list;
+  fill(list, 22);
+  losePage(1);
+  const Walked walked(list);
+  EXPECT_EQ(walked.places,
+            (std::vector<std::size_t>{0, 1, 4, 5, 6, 7, 8, 9, 10, 11, 12, 13, 14, 15, 16, 17, 18, 19, 20, 21}));
+  EXPECT_EQ(walked.beginnings, (std::vector<std::size_t>{0, 4, 6}));
+}
+
+TEST_F(ListPages, WalkKeepsMessagesInTheirPlaces) {
+  List list;
+  fill(list, 3);
+  ASSERT_EQ(list.overflowed(), 0U);
+  List other;
+  list.forEach([&](std::size_t, const Record&) { fill(other, 30); }, [] {});
+  EXPECT_EQ(list.overflowed(), 0U);
 }
 
 }  // namespace

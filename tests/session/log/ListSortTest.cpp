@@ -231,6 +231,7 @@ TEST_F(OverlappingPages, AreGoneThroughBackwardsWithTheirPlaces) {
               [&](std::size_t place, const Record& record) {
                 places.push_back(place);
                 found.push_back(numberOf(record));
+                return true;
               });
   EXPECT_EQ(found, downFrom(22));
   EXPECT_TRUE(std::equal(places.begin(), places.end(), found.begin(), found.end(),

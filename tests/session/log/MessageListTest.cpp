@@ -290,6 +290,34 @@ TEST_F(MessageList, AccountHasWhatItsListsTake) {
   EXPECT_EQ(account->bytes, 0U);
 }
 
+TEST_F(MessageList, SortTellsWhetherMessagesInMemoryWereMoved) {
+  List list;
+  fill(list, 3);
+  EXPECT_FALSE(list.sort());
+  list.append(numbered(3, -1));
+  EXPECT_TRUE(list.sort());
+  EXPECT_EQ(numbers(list), (std::vector<std::int64_t>{3, 0, 1, 2}));
+}
+
+TEST_F(MessageList, GoingBackEndsWhenTheTakerHasEnough) {
+  platform_.overflow.setBounds(2000, kNoBound);
+  List list;
+  fill(list, 200);
+  ASSERT_GT(list.overflowed(), 0U);
+  std::size_t taken = 0;
+  const auto any = [](TarnReportingSessionMessage::Kind) { return true; };
+  const auto takeUntil = [&](std::size_t enough) {
+    taken = 0;
+    list.goBack(any, [&](std::size_t, const Record&) { return ++taken < enough; });
+  };
+  takeUntil(1);
+  EXPECT_EQ(taken, 1U);
+  EXPECT_EQ(platform_.overflow.blocksRead(), 0U);
+  takeUntil(list.size() - list.overflowed() + 1);
+  EXPECT_EQ(taken, list.size() - list.overflowed() + 1);
+  EXPECT_EQ(platform_.overflow.blocksRead(), 1U);
+}
+
 TEST_F(MessageList, SortedPagesAreNotReadForASort) {
   platform_.overflow.setBounds(2000, kNoBound);
   List list;
