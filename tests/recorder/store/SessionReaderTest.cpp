@@ -219,8 +219,8 @@ TEST_F(SessionReaderViewTest, ReadsEventsThatAreAView) {
 TEST_F(SessionReaderViewTest, AViewThatNeverEndsIsGivenUp) {
   makeStore();
   sql("DROP TABLE events; CREATE VIEW events AS WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n)"
-      " SELECT i AS id, 0 AS time, 'tally' AS backend, '' AS name, '' AS payload, '' AS detail, i % 2 + 5 AS session "
-      "FROM n;");
+      " SELECT i AS id, 0 AS time, 'tally' AS backend, 'n' || i % 2 AS name, '' AS payload, '' AS detail,"
+      " i % 2 + 5 AS session FROM n;");
   SessionReader reader(file());
   ASSERT_TRUE(reader.open().ok());
   EXPECT_EQ(reader.newest(1, "n", 1, 2).error.text(), file().string() + ": its tables lead into themselves");
