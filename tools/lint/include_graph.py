@@ -62,7 +62,9 @@ ROOMS = {
     "testing": BASE + ("service/vocabulary", "testing/backends"),
     "tools/script": PROGRAM,
     "tools/mutate": (),
-    "tools/ctl": PROGRAM + ("client", "dictionary", "tools/script"),
+    "tools/ctl/terminal": PROGRAM + ("tools/ctl",),
+    "tools/ctl/sessions": PROGRAM + ("tools/ctl", "tools/ctl/terminal", "tools/script"),
+    "tools/ctl": PROGRAM + ("client", "dictionary", "tools/script", "tools/ctl/sessions", "tools/ctl/terminal"),
     # What checks the service shares no code with it, but for the client and the reader of the recorder's file.
     "tests/scenario": VALUES + ("client", "wire", "recorder/store"),
 }
