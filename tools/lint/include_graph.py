@@ -62,6 +62,7 @@ ROOMS = {
     "testing": BASE + ("service/vocabulary", "testing/backends"),
     "tools/script": PROGRAM,
     "tools/mutate": (),
+    "tools/report": VALUES + ("host/system", "recorder/store"),
     "tools/ctl": PROGRAM + ("client", "dictionary", "tools/script"),
     # What checks the service shares no code with it, but for the client and the reader of the recorder's file.
     "tests/scenario": VALUES + ("client", "wire", "recorder/store"),
