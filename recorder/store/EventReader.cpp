@@ -10,6 +10,7 @@
 
 #include "recorder/store/GlobPattern.h"
 #include "recorder/store/Statement.h"
+#include "recorder/store/StoreAccess.h"
 
 namespace tarn::recorder {
 
@@ -45,10 +46,9 @@ int spendSteps(void* stepsLeft) {
   return left < 0 ? 1 : 0;
 }
 
-// Nothing that a file's schema says is carried out beyond reading its tables.
+// Nothing that a file's schema says is carried out beyond reading its tables and the view of events.
 void distrust(sqlite3* database, std::int64_t& stepsLeft) {
-  for (const int option :
-       {SQLITE_DBCONFIG_TRUSTED_SCHEMA, SQLITE_DBCONFIG_ENABLE_VIEW, SQLITE_DBCONFIG_ENABLE_TRIGGER}) {
+  for (const int option : {SQLITE_DBCONFIG_TRUSTED_SCHEMA, SQLITE_DBCONFIG_ENABLE_TRIGGER}) {
     sqlite3_db_config(database, option, 0, nullptr);
   }
   sqlite3_progress_handler(database, kStepsAtOnce, spendSteps, &stepsLeft);
@@ -130,6 +130,10 @@ Status EventReader::open() {
 
 Result<EventPage> EventReader::read(const EventQuery& query) {
   const Identity now = identity();
+  if (presenceOf(file_) == Presence::Refused) {
+    connection_.close();
+    return {{}, refusalOf(file_)};
+  }
   if (!now.there) {
     connection_.close();
     if (lastRead_) {
@@ -163,12 +167,16 @@ Result<EventPage> EventReader::readOpen(const EventQuery& query) {
   dataVersion_ = connection_.integer("PRAGMA data_version").value_or(-1);
   if (connection_.run("BEGIN") != SQLITE_OK) return {{}, about(lastError().text)};
   std::int64_t after = query.after;
+  // A file of the first layout has a table of them.
   const auto tables = connection_.integer(
-      "SELECT count(*) FROM sqlite_schema WHERE name = 'events' AND type = 'table' AND rootpage > 0");
+      "SELECT count(*) FROM sqlite_schema, pragma_user_version WHERE name = 'events' AND "
+      "((type = 'table' AND rootpage > 0) OR (type = 'view' AND user_version > 0))");
   if (tables == 0) {
     static_cast<void>(connection_.run("ROLLBACK"));
     return missing();
   }
+  result.value.hasSessions =
+      connection_.integer("SELECT count(*) FROM pragma_table_info('events') WHERE name = 'session'") == 1;
   after = startingPoint(after);
   const auto error = readRows(query, after, result.value);
   static_cast<void>(connection_.run("ROLLBACK"));
@@ -178,17 +186,15 @@ Result<EventPage> EventReader::readOpen(const EventQuery& query) {
 }
 
 Status EventReader::readRows(const EventQuery& query, std::int64_t after, EventPage& page) {
-  std::string sql = "SELECT id, time, backend, name, payload, detail FROM events WHERE id > ?1";
-  if (query.backend) {
-    sql += " AND backend = ?2";
-  }
-  if (query.nameGlob) {
-    sql += " AND matches_glob(?3, name)";
-  }
-  sql += " ORDER BY id LIMIT ?4";
+  const std::string session = page.hasSessions ? "session" : "NULL";
+  std::string sql = "SELECT id, time, backend, name, payload, detail, " + session + " FROM events WHERE id > ?1";
+  sql.append(query.backend ? " AND backend = ?2" : "").append(query.nameGlob ? " AND matches_glob(?3, name)" : "");
+  sql.append(query.session ? " AND " + session + " = ?5" : "").append(query.since ? " AND time >= ?6" : "");
+  sql.append(query.until ? " AND time < ?7" : "").append(" ORDER BY id LIMIT ?4");
   Statement rows;
   if (rows.prepare(connection_.handle(), sql) != SQLITE_OK) return lastError();
   rows.bind(1, after).bind(4, static_cast<std::int64_t>(query.limit));
+  rows.bind(5, query.session.value_or(0)).bind(6, query.since.value_or(0)).bind(7, query.until.value_or(0));
   if (query.backend) {
     rows.bind(2, std::string_view(*query.backend));
   }
@@ -202,7 +208,8 @@ Status EventReader::readRows(const EventQuery& query, std::int64_t after, EventP
     }
     if (textLeft_ < 0) return Error{SQLITE_CORRUPT, "its rows say more than it holds"};
     page.rows.push_back({rows.integer(0), rows.real(1), std::string(rows.text(2)), std::string(rows.text(3)),
-                         std::string(rows.text(4)), std::string(rows.text(5))});
+                         std::string(rows.text(4)), std::string(rows.text(5)),
+                         rows.isNull(6) ? std::nullopt : std::optional(rows.integer(6))});
   }
   if (code != SQLITE_DONE) return lastError();
   page.more = page.rows.size() == query.limit;

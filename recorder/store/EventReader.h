@@ -29,15 +29,20 @@ struct EventRow {
   double time = 0;  // epoch seconds
   std::string backend;
   std::string name;
-  std::string payload;  // JSON
-  std::string detail;   // JSON
+  std::string payload;                       // JSON
+  std::string detail;                        // JSON
+  std::optional<std::int64_t> session = {};  // on whose behalf it was handed over: `sessions.id`
 };
 
 // Which events; all that is given must hold.
 struct EventQuery {
   std::optional<std::string> backend;
   std::optional<std::string> nameGlob;  // see globMatches
-  std::int64_t after = 0;               // events with greater ids
+  std::optional<std::int64_t> session;  // `sessions.id`
+  // Epoch seconds, the first included, the second not.
+  std::optional<double> since;
+  std::optional<double> until;
+  std::int64_t after = 0;  // events with greater ids
   // Rows of a page at the most.
   std::size_t limit = 1000;
 };
@@ -49,7 +54,8 @@ struct EventPage {
   // Where the next query goes on: the id up to which events were looked at. Less than the query's `after` when the
   // file was replaced by one whose ids start again; its rows are then in this page.
   std::int64_t lookedUpTo = 0;
-  bool more = false;  // the limit cut it short
+  bool more = false;         // the limit cut it short
+  bool hasSessions = false;  // the file knows them; of one that doesn't no event is of any
 };
 
 class EventReader {
@@ -59,9 +65,9 @@ class EventReader {
   EventReader(const EventReader&) = delete;
   EventReader& operator=(const EventReader&) = delete;
 
-  // The next page, by ascending id, of one state of the file. The error names the file: it can't be opened, is damaged,
-  // or costs more to read than its bytes are worth. A later call tries again from the path. Waits up to two seconds for
-  // a lock.
+  // The next page, by ascending id, of one state of the file. The error names the file: it can't be opened or refuses
+  // this user, is damaged, or costs more to read than its bytes are worth. A later call tries again from the path.
+  // Waits up to two seconds for a lock.
   Result<EventPage> read(const EventQuery& query);
   // Blocks until something was written since the last read, or until the time is up; whether there is reason to read.
   // Without the system's watches it looks at least five times a second.
