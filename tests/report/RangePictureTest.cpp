@@ -60,14 +60,14 @@ TEST(RangePicture, OpenPeriodEndsWithItsSessionOrNow) {
   EXPECT_EQ(picture.sessions[1].activeSeconds, 60);
 }
 
-TEST(RangePicture, GroupsAreByApplicationAndTypeTheMostActiveFirst) {
+TEST(RangePicture, GroupsAreByApplicationAndTypeTheMostSessionsFirst) {
   RangeBuilder builder({}, kStart + 1000);
   SessionRow call = sessionRow(1, 0, 100);
   call.serviceName = "telephony";
   builder.add(call);
   builder.add(sessionRow(2, 0, 100));
   builder.add(sessionRow(3, 0, 100));
-  builder.add(periodRow(1, 0, 10));
+  builder.add(periodRow(1, 0, 80));
   builder.add(periodRow(2, 0, 30));
   builder.add(periodRow(3, 0, 40));
   builder.add(messageRow(3, 5, "Error.Error", ""));

@@ -142,12 +142,12 @@ TEST_F(ReportMaker, StoreWithoutSessionsMakesAnEmptyReport) {
   EXPECT_TRUE(report.value.sessions.empty());
 }
 
-TEST_F(ReportMaker, FileWithoutTheTablesIsRefusedWithItsName) {
-  file_.sql("DROP TABLE sessions");
+TEST_F(ReportMaker, FileOfTheFirstVersionIsRefusedWithItsName) {
+  file_.sql("PRAGMA user_version = 0");
   ReportStore store(file_.path());
   const Status opened = store.open();
   ASSERT_TRUE(opened.failed());
-  EXPECT_NE(opened->text.find(file_.path() + " holds no sessions"), std::string::npos) << opened->text;
+  EXPECT_NE(opened->text.find(file_.path() + " has no sessions yet"), std::string::npos) << opened->text;
 }
 
 TEST_F(ReportMaker, FileThatIsNotThereIsRefusedWithItsName) {

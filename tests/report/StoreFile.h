@@ -22,7 +22,8 @@ class StoreFile {
         "uid INTEGER, process TEXT, application TEXT, service_type INTEGER, service_name TEXT, created REAL, "
         "ended REAL, end_reason TEXT);"
         "CREATE TABLE periods(id INTEGER PRIMARY KEY, session INTEGER, started REAL, stopped REAL, messages INTEGER, "
-        "redundant INTEGER, first_event INTEGER, last_event INTEGER)");
+        "redundant INTEGER, first_event INTEGER, last_event INTEGER);"
+        "PRAGMA user_version = 1");
   }
   StoreFile(const StoreFile&) = delete;
   StoreFile& operator=(const StoreFile&) = delete;

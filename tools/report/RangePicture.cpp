@@ -53,8 +53,9 @@ std::vector<GroupFigures> groupsOf(const std::vector<SessionFigures>& sessions) 
   for (auto& entry : groups) {
     sorted.push_back(std::move(entry.second));
   }
-  std::stable_sort(sorted.begin(), sorted.end(),
-                   [](const GroupFigures& a, const GroupFigures& b) { return a.activeSeconds > b.activeSeconds; });
+  std::stable_sort(sorted.begin(), sorted.end(), [](const GroupFigures& a, const GroupFigures& b) {
+    return a.sessions > b.sessions || (a.sessions == b.sessions && a.activeSeconds > b.activeSeconds);
+  });
   return sorted;
 }
 

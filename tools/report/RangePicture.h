@@ -54,7 +54,7 @@ struct RangePicture {
   double to = 0;
   SessionFigures totals;                             // its session means nothing
   std::vector<SessionFigures> sessions;              // the newest first
-  std::vector<GroupFigures> groups;                  // the most active first
+  std::vector<GroupFigures> groups;                  // the most sessions first, then the most active
   std::vector<TimeBin> days;                         // whole days of UTC, or as many of them as a picture has room for
   std::vector<TimeBin> hours;                        // whole hours, or whole days where the range is long
   std::array<double, kVolumeBuckets> playSeconds{};  // of derived segments, by volume

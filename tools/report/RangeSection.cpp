@@ -16,6 +16,7 @@ namespace {
 constexpr double kHour = 3600;
 constexpr std::size_t kMostGroups = 20;  // as bars and as rows; the rest is one more
 constexpr std::size_t kNameCharacters = 60;
+constexpr std::size_t kLabelCharacters = 22;  // of an application, so that the type has room after it
 
 std::string nameText(const std::string& name) {
   return name.empty() ? "unknown" : shortened(name, kNameCharacters);
@@ -36,7 +37,7 @@ void writeTotals(Markup& markup, const RangePicture& picture) {
   facts.row("Issues", picture.totals.issues);
 }
 
-// The most active ones, and one that is all the others.
+// The first ones, and one that is all the others.
 std::vector<GroupFigures> shownGroups(const RangePicture& picture) {
   std::vector<GroupFigures> shown = picture.groups;
   if (shown.size() <= kMostGroups) return shown;
@@ -58,12 +59,14 @@ void writeGroups(Markup& markup, const RangePicture& picture) {
   const std::vector<GroupFigures> groups = shownGroups(picture);
   std::vector<Bar> bars;
   for (const GroupFigures& group : groups) {
-    bars.push_back({nameText(group.application) + ", " + nameText(group.serviceName),
+    bars.push_back({shortened(nameText(group.application), kLabelCharacters) + ", " + nameText(group.serviceName),
                     static_cast<double>(group.sessions), countText(group.sessions, "session", "sessions"), "output"});
   }
   const std::string name = "Sessions by application and type";
   markup.line().element("h3", {}, name);
-  drawBars(markup, {"applications", name, "A bar for each application and service type, the most active first."}, bars);
+  drawBars(markup,
+           {"applications", name, "A bar for each application and service type, those with the most sessions first."},
+           bars);
   Table table(markup, name, {"Application", "Type", "Sessions", "Active, h", "Overloads", "Errors"});
   for (const GroupFigures& group : groups) {
     table.row({nameText(group.application), nameText(group.serviceName), group.sessions, group.activeSeconds / kHour,

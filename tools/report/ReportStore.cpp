@@ -1,7 +1,5 @@
 #include "tools/report/ReportStore.h"
 
-#include <sqlite3.h>
-
 #include <limits>
 #include <utility>
 
@@ -10,8 +8,6 @@
 namespace tarn::report {
 
 namespace {
-
-constexpr int kBusyMilliseconds = 2000;
 
 constexpr std::string_view kSelectSessions =
     "SELECT id, reporter, pid, uid, process, application, service_name, created, ended, end_reason FROM sessions ";
@@ -45,7 +41,13 @@ SessionRow sessionRow(const recorder::Statement& row) {
 }
 
 PeriodRow periodRow(const recorder::Statement& row) {
-  return {row.integer(0), row.real(1), realOrNothing(row, 2), row.integer(3), row.integer(4)};
+  PeriodRow period;
+  period.session = row.integer(0);
+  period.started = row.real(1);
+  period.stopped = realOrNothing(row, 2);
+  period.messages = row.integer(3);
+  period.redundant = row.integer(4);
+  return period;
 }
 
 std::string listOf(const std::vector<std::int64_t>& ids) {
@@ -58,37 +60,12 @@ std::string listOf(const std::vector<std::int64_t>& ids) {
 
 }  // namespace
 
-Error ReportStore::lastError() const {
-  return {sqlite3_errcode(connection_.handle()), file_.string() + ": " + connection_.errorText()};
-}
-
-Status ReportStore::open() {
-  if (connection_.open(file_.string(), SQLITE_OPEN_READONLY) != SQLITE_OK) return lastError();
-  sqlite3_busy_timeout(connection_.handle(), kBusyMilliseconds);
-  // Nothing that the file's schema says is carried out but its views.
-  sqlite3_db_config(connection_.handle(), SQLITE_DBCONFIG_TRUSTED_SCHEMA, 0, nullptr);
-  sqlite3_db_config(connection_.handle(), SQLITE_DBCONFIG_ENABLE_TRIGGER, 0, nullptr);
-  if (connection_.run("BEGIN") != SQLITE_OK) return lastError();
-  const auto tables = connection_.integer(
-      "SELECT count(*) FROM sqlite_schema WHERE name IN ('sessions', 'periods', 'events') AND type IN ('table', "
-      "'view')");
-  if (!tables) return lastError();
-  if (*tables == 3) return {};
-  return Error{SQLITE_MISMATCH, file_.string() + " holds no sessions: no service that keeps them has written to it"};
-}
-
-Status ReportStore::each(const std::string& sql, const TimeRange& range,
-                         const std::function<void(const recorder::Statement&)>& take) {
+Status ReportStore::each(const std::string& sql, const TimeRange& range, const StoreMoment::Take& take) {
   constexpr double kEver = std::numeric_limits<double>::infinity();
-  recorder::Statement rows;
-  if (rows.prepare(connection_.handle(), sql) != SQLITE_OK) return lastError();
-  rows.bind(1, range.since.value_or(-kEver)).bind(2, range.until.value_or(kEver));
-  int code = rows.step();
-  for (; code == SQLITE_ROW; code = rows.step()) {
-    take(rows);
-  }
-  if (code != SQLITE_DONE) return lastError();
-  return {};
+  const auto bind = [&](recorder::Statement& rows) {
+    rows.bind(1, range.since.value_or(-kEver)).bind(2, range.until.value_or(kEver));
+  };
+  return moment_.each(sql, bind, take);
 }
 
 Result<std::vector<SessionRow>> ReportStore::sessions(const TimeRange& range) {

@@ -1,8 +1,7 @@
 // ReportStore: reads from the recorder's file what a report is made of, all of one moment.
 //
-// The file is opened read-only and may be written meanwhile. Over many sessions the events are passed over once, and
-// only the payloads that can count are brought out. Owner: who makes a report. Threads: one at a time. It may block on
-// the disk.
+// Over many sessions the events are passed over once, and only the payloads that can count are brought out. How the
+// file is opened: StoreMoment. Owner: who makes a report. Threads: one at a time. It may block on the disk.
 #pragma once
 
 #include <cstdint>
@@ -13,20 +12,19 @@
 #include <vector>
 
 #include "plist/Result.h"
-#include "recorder/store/Connection.h"
-#include "recorder/store/Statement.h"
 #include "tools/report/Rows.h"
+#include "tools/report/StoreMoment.h"
 
 namespace tarn::report {
 
 class ReportStore {
  public:
-  explicit ReportStore(std::filesystem::path file) : file_(std::move(file)) {}
+  explicit ReportStore(std::filesystem::path file) : moment_(std::move(file)) {}
   ReportStore(const ReportStore&) = delete;
   ReportStore& operator=(const ReportStore&) = delete;
 
   // To be called once, before anything else. Every error names the file.
-  [[nodiscard]] Status open();
+  [[nodiscard]] Status open() { return moment_.open(); }
   // Sessions of which a part lies in the range, by their ids.
   Result<std::vector<SessionRow>> sessions(const TimeRange& range);
   // Those of these that are there.
@@ -41,13 +39,10 @@ class ReportStore {
   Result<std::map<std::int64_t, std::vector<PeriodRow>>> periodsOf(const std::vector<std::int64_t>& ids);
 
  private:
-  // Prepares, and calls `take` for each row.
-  [[nodiscard]] Status each(const std::string& sql, const TimeRange& range,
-                            const std::function<void(const recorder::Statement&)>& take);
-  Error lastError() const;
+  // Asks with the range's ends in the first two places.
+  [[nodiscard]] Status each(const std::string& sql, const TimeRange& range, const StoreMoment::Take& take);
 
-  const std::filesystem::path file_;
-  recorder::Connection connection_;
+  StoreMoment moment_;
 };
 
 }  // namespace tarn::report

@@ -7,30 +7,12 @@
 #include <optional>
 #include <string>
 
+#include "recorder/store/SessionReader.h"
+
 namespace tarn::report {
 
-// One session, from its creation to its end.
-struct SessionRow {
-  std::int64_t id = 0;
-  std::int64_t reporter = 0;
-  std::int64_t pid = 0;
-  std::int64_t uid = 0;
-  std::string process;
-  std::string application;
-  std::string serviceName;
-  double created = 0;
-  std::optional<double> ended;  // nothing while it is open
-  std::string endReason;
-};
-
-// One stretch from a start to its stop.
-struct PeriodRow {
-  std::int64_t session = 0;
-  double started = 0;
-  std::optional<double> stopped;  // nothing while it runs
-  std::int64_t messages = 0;
-  std::int64_t redundant = 0;
-};
+using recorder::PeriodRow;
+using recorder::SessionRow;
 
 // One event that a back-end got on a session's behalf.
 struct EventRow {

@@ -37,7 +37,7 @@ table { border-collapse: collapse; margin: .8rem 0; font-size: .9rem; }
 caption { text-align: left; font-weight: 600; padding: .2rem 0; }
 th, td { border: 1px solid var(--rule); padding: .15rem .5rem; text-align: left; vertical-align: top;
   overflow-wrap: anywhere; }
-thead th { background: var(--panel); }
+thead th { background: var(--panel); overflow-wrap: normal; }
 th { font-weight: 600; }
 .n { text-align: right; font-variant-numeric: tabular-nums; white-space: nowrap; }
 summary { cursor: pointer; color: var(--link); }
