@@ -47,5 +47,7 @@ void addLintCommand(CLI::App& app, Context& context);
 void addExplainCommand(CLI::App& app, Context& context);
 // Compares the recorded events with their checksums; changes nothing.
 void addCheckCommand(CLI::App& app, Context& context);
+// Shows the open sessions, what waits and the ledger, again and again (views/TopLoop).
+void addTopCommand(CLI::App& app, Context& context);
 
 }  // namespace tarn::ctl

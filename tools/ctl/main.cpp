@@ -66,6 +66,7 @@ void describe(CLI::App& app, Context& context, Options& options) {
   addLintCommand(app, context);
   addExplainCommand(app, context);
   addCheckCommand(app, context);
+  addTopCommand(app, context);
 }
 
 // The words of the command line, last one first. A value of --wait stands after a sign alone: what follows it is the

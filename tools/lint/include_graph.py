@@ -63,6 +63,7 @@ ROOMS = {
     "tools/script": PROGRAM,
     "tools/mutate": (),
     "tools/report": VALUES + ("host/system", "recorder/store"),
+    "tools/ctl/views": PROGRAM + ("client", "tools/ctl", "tools/report"),
     "tools/ctl": PROGRAM + ("client", "dictionary", "tools/script"),
     # What checks the service shares no code with it, but for the client and the reader of the recorder's file.
     "tests/scenario": VALUES + ("client", "wire", "recorder/store"),
