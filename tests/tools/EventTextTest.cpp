@@ -12,15 +12,22 @@ recorder::EventRow row() {
 }
 
 TEST(EventText, JsonHoldsTheSixMembersInTheirOrder) {
-  EXPECT_EQ(eventJson(row()),
+  EXPECT_EQ(eventJson(row(), false),
             R"({"id":42,"time":1795158000.125,"backend":"tally","name":"sys.oxbow.tarnkit.Volume.Summary",)"
             R"("payload":{"a":1},"detail":{}})");
+}
+
+TEST(EventText, JsonTellsTheSessionWhereThereAreSessions) {
+  recorder::EventRow event = row();
+  EXPECT_TRUE(eventJson(event, true).ends_with(R"("detail":{},"session":null})"));
+  event.session = 12;
+  EXPECT_TRUE(eventJson(event, true).ends_with(R"("detail":{},"session":12})"));
 }
 
 TEST(EventText, JsonEscapesNames) {
   recorder::EventRow odd = row();
   odd.name = "a\"b\n";
-  EXPECT_NE(eventJson(odd).find(R"("name":"a\"b\n")"), std::string::npos);
+  EXPECT_NE(eventJson(odd, false).find(R"("name":"a\"b\n")"), std::string::npos);
 }
 
 TEST(EventText, LineStartsEachColumnBelowItsHeading) {

@@ -10,6 +10,7 @@
 #include <string>
 
 #include "tools/ctl/ServiceConnection.h"
+#include "tools/ctl/terminal/Terminal.h"
 
 namespace CLI {
 class App;
@@ -24,6 +25,7 @@ namespace tarn::ctl {
 struct Context {
   ServiceAddress socket;       // of the service
   std::string stateDirectory;  // of the service
+  Terminal terminal = {};      // how results may look
   std::function<int()> chosen;
 };
 
@@ -49,5 +51,12 @@ void addExplainCommand(CLI::App& app, Context& context);
 void addCheckCommand(CLI::App& app, Context& context);
 // Shows the open sessions, what waits and the ledger, again and again (views/TopLoop).
 void addTopCommand(CLI::App& app, Context& context);
+
+// Lists the sessions that the recorder holds.
+void addSessionsCommand(CLI::App& app, Context& context);
+// Tells what one of them did, on one screen.
+void addShowCommand(CLI::App& app, Context& context);
+// Prints one of them for other programs, or as a script.
+void addExportCommand(CLI::App& app, Context& context);
 
 }  // namespace tarn::ctl

@@ -51,15 +51,18 @@ std::string rightAligned(const std::string& text, int width) {
 
 }  // namespace
 
-std::string eventJson(const recorder::EventRow& row) {
+std::string eventJson(const recorder::EventRow& row, bool hasSession) {
   std::string text = "{\"id\":" + std::to_string(row.id) + ",\"time\":";
   plist::appendJson(text, row.time);
   text += ",\"backend\":";
   plist::appendJsonText(text, row.backend);
   text += ",\"name\":";
   plist::appendJsonText(text, row.name);
-  text += ",\"payload\":" + row.payload + ",\"detail\":" + row.detail + '}';
-  return text;
+  text += ",\"payload\":" + row.payload + ",\"detail\":" + row.detail;
+  if (hasSession) {
+    text += ",\"session\":" + (row.session ? std::to_string(*row.session) : "null");
+  }
+  return text + '}';
 }
 
 std::string eventLine(const recorder::EventRow& row) {

@@ -7,9 +7,10 @@
 
 namespace tarn::ctl {
 
-// {"id", "time", "backend", "name", "payload", "detail"}. The time is in epoch seconds; payload and detail are the
-// objects that were recorded. One line, whatever they hold.
-std::string eventJson(const recorder::EventRow& row);
+// {"id", "time", "backend", "name", "payload", "detail"}, and "session" (null for nobody's) where the file has
+// sessions. The time is in epoch seconds; payload and detail are the objects that were recorded. One line, whatever
+// they hold.
+std::string eventJson(const recorder::EventRow& row, bool hasSession);
 
 // A table's line; columns are aligned for names of usual length. The time is in UTC with milliseconds, or epoch seconds
 // beyond the years 1970 to 9999. Texts are printable(); an empty detail is left out.

@@ -2,14 +2,19 @@
 #include <unistd.h>
 
 #include <CLI/CLI.hpp>
+#include <algorithm>
 #include <chrono>
 #include <csignal>
+#include <limits>
 #include <memory>
 
 #include "recorder/store/EventReader.h"
+#include "recorder/store/StoreAccess.h"
 #include "tools/ctl/Command.h"
 #include "tools/ctl/EventText.h"
 #include "tools/ctl/Output.h"
+#include "tools/ctl/sessions/SessionEvents.h"
+#include "tools/ctl/terminal/TimeOption.h"
 
 namespace tarn::ctl {
 
@@ -21,9 +26,13 @@ struct Arguments {
   recorder::EventQuery query;
   std::string backend;
   std::string nameGlob;
+  TimeRange range;
+  std::int64_t session = 0;
+  std::size_t limit = 0;  // 0: all
   bool follow = false;
   bool asJson = false;
   bool settled = false;
+  bool once = false;
 };
 
 volatile std::sig_atomic_t stopRequested = 0;
@@ -49,22 +58,29 @@ bool outputIsWanted() {
 class EventPrinter {
  public:
   EventPrinter(const Context& context, const Arguments& arguments)
-      : path_(context.stateDirectory + "/recorder.sqlite3"), arguments_(arguments), reader_(path_) {}
+      : path_(context.stateDirectory + "/recorder.sqlite3"),
+        isQuiet_(context.terminal.quiet),
+        arguments_(arguments),
+        reader_(path_) {}
 
   int print();
 
  private:
   // Prints what is there beyond the last one. False when it can't be read.
   bool printNew();
-  void printRow(const recorder::EventRow& row);
+  void printRow(const recorder::EventRow& row, bool hasSession);
+  bool isEnough() const { return arguments_.limit > 0 && printed_ >= arguments_.limit; }
 
   static constexpr std::chrono::milliseconds kPatience{200};  // as long a signal may go unnoticed
 
   const std::string path_;
+  const bool isQuiet_;
   const Arguments& arguments_;
   EventReader reader_;
+  MessageSieve sieve_;
   Output output_{STDOUT_FILENO};
   std::int64_t after_ = 0;
+  std::size_t printed_ = 0;
   bool isMissing_ = false;
   bool headingIsPrinted_ = false;
 };
@@ -76,7 +92,7 @@ int EventPrinter::print() {
     complain("there are no events: " + path_ + " is not there");
     return kFailure;
   }
-  while (arguments_.follow && stopRequested == 0 && output_.good() && outputIsWanted()) {
+  while (arguments_.follow && stopRequested == 0 && !isEnough() && output_.good() && outputIsWanted()) {
     if (reader_.waitForChange(kPatience) && !printNew()) return kFailure;
   }
   return output_.status();
@@ -87,6 +103,9 @@ bool EventPrinter::printNew() {
   Result<recorder::EventPage> page;
   do {
     query.after = after_;
+    if (arguments_.limit > 0) {
+      query.limit = std::min(query.limit, arguments_.limit - printed_);
+    }
     page = reader_.read(query);
     if (page.failed()) {
       complain("can't read " + page.error->text);
@@ -94,20 +113,27 @@ bool EventPrinter::printNew() {
     }
     isMissing_ = page.value.missing;
     if (isMissing_) return true;
+    if (query.session && !page.value.hasSessions) {
+      complain(recorder::noSessionsIn(path_).text);
+      return false;
+    }
     for (const recorder::EventRow& row : page.value.rows) {
-      printRow(row);
+      if (!arguments_.once || sieve_.letsThrough(row)) {
+        printRow(row, page.value.hasSessions);
+      }
     }
     after_ = page.value.lookedUpTo;
-  } while (page.value.more && output_.good() && stopRequested == 0);
+  } while (page.value.more && !isEnough() && output_.good() && stopRequested == 0);
   return true;
 }
 
-void EventPrinter::printRow(const recorder::EventRow& row) {
+void EventPrinter::printRow(const recorder::EventRow& row, bool hasSession) {
+  ++printed_;
   if (arguments_.asJson) {
-    output_.line(eventJson(row));
+    output_.line(eventJson(row, hasSession));
     return;
   }
-  if (!headingIsPrinted_) {
+  if (!headingIsPrinted_ && !isQuiet_) {
     headingIsPrinted_ = true;
     output_.line(eventHeading());
   }
@@ -115,7 +141,12 @@ void EventPrinter::printRow(const recorder::EventRow& row) {
 }
 
 int events(const Context& context, Arguments& arguments, bool hasBackend, bool hasName) {
-  if (!isNamed(context.stateDirectory, "--state-dir")) return kWrongUsage;
+  if (!isNamed(context.stateDirectory, "--state-dir") || !arguments.range.read()) return kWrongUsage;
+  arguments.query.since = arguments.range.since;
+  arguments.query.until = arguments.range.until;
+  if (arguments.session > 0) {
+    arguments.query.session = arguments.session;
+  }
   if (hasBackend) {
     arguments.query.backend = arguments.backend;
   }
@@ -142,13 +173,24 @@ void addEventsCommand(CLI::App& app, Context& context) {
   command->add_option("--name", arguments->nameGlob, "Only events whose name matches this pattern (*, ?, [a-z])")
       ->type_name("GLOB");
   command->add_option("--after", arguments->query.after, "Only events with greater ids")->type_name("ID");
-  command->add_flag("--json", arguments->asJson, "Print one object a line: id, time, backend, name, payload, detail");
+  command->add_option("--session", arguments->session, "Only events of this session, as \"sessions\" numbers them")
+      ->type_name("SESSION")
+      ->check(CLI::Range(std::int64_t{1}, std::numeric_limits<std::int64_t>::max()));
+  arguments->range.addTo(*command, "Only events");
+  command->add_option("--limit", arguments->limit, "The first so many, then the end")
+      ->type_name("N")
+      ->check(CLI::Range(1, std::numeric_limits<int>::max()));
+  command->add_flag("--once", arguments->once,
+                    "Each message once: not under both of its analytics names, nor its mirror");
+  command->add_flag("--json", arguments->asJson,
+                    "Print one object a line: id, time, backend, name, payload, detail, session");
   command->add_flag("--settled", arguments->settled,
                     "First wait until all that came to the service by now is on the disk");
   command->footer(
       "\nReads the recorder in the state directory; the service need not run. --settled asks it when it does.\n\n"
       "Examples:\n"
       "  tarnreportingctl events --name '*.Summary'\n"
+      "  tarnreportingctl events --since -1h --once\n"
       "  tarnreportingctl events --follow --json | jq .payload.audiotag");
   command->callback([&context, command, arguments] {
     const bool hasBackend = command->count("--backend") > 0;

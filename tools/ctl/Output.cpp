@@ -12,6 +12,16 @@ bool Output::line(std::string_view text) {
   if (!good()) return false;
   buffer_.clear();
   plist::appendPrintable(buffer_, text, plist::LineEnds::Escaped);
+  return writeBuffer();
+}
+
+bool Output::paintedLine(std::string_view text) {
+  if (!good()) return false;
+  buffer_ = text;
+  return writeBuffer();
+}
+
+bool Output::writeBuffer() {
   buffer_ += '\n';
   failure_ = linux_host::writeAll(fd_, buffer_);
   return good();

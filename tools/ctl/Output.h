@@ -30,6 +30,9 @@ class Output {
   // added. False once anything could not be written.
   bool line(std::string_view text);
 
+  // The same for a line that was made printable part by part, so that paint may stand between them (Terminal).
+  bool paintedLine(std::string_view text);
+
   // Whether everything could be written so far. Who prints much looks at it between two lines.
   bool good() const noexcept { return failure_.ok(); }
   // The exit status that the output itself asks for: success while it is good, and when the reader simply left; else it
@@ -37,6 +40,9 @@ class Output {
   int status() const;
 
  private:
+  // Its line end is added.
+  bool writeBuffer();
+
   int fd_;
   std::string buffer_;
   Status failure_;

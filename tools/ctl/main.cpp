@@ -26,6 +26,8 @@ struct Options {
   std::string socket;
   double timeout = 5;
   std::optional<double> wait;
+  std::string color = "auto";
+  bool quiet = false;
 };
 
 constexpr const char* kDescription = "Talks to the audio reporting service and reads what it recorded.";
@@ -53,6 +55,10 @@ void describe(CLI::App& app, Context& context, Options& options) {
   app.add_option("--state-dir", context.stateDirectory, "The service's state directory")
       ->capture_default_str()
       ->type_name("DIR");
+  app.add_option("--color", options.color, "Colours: auto (on a terminal, unless NO_COLOR is set), always or never")
+      ->type_name("WHEN")
+      ->check(CLI::IsMember({"auto", "always", "never"}));
+  app.add_flag("-q,--quiet", options.quiet, "No headings and no remarks: results alone");
   app.require_subcommand(1);
   // The options above may also stand after the command.
   app.fallthrough();
@@ -66,7 +72,15 @@ void describe(CLI::App& app, Context& context, Options& options) {
   addLintCommand(app, context);
   addExplainCommand(app, context);
   addCheckCommand(app, context);
+  addSessionsCommand(app, context);
+  addShowCommand(app, context);
+  addExportCommand(app, context);
   addTopCommand(app, context);
+}
+
+ColorChoice colorChoice(const std::string& text) {
+  if (text == "always") return ColorChoice::Always;
+  return text == "never" ? ColorChoice::Never : ColorChoice::Auto;
 }
 
 // The words of the command line, last one first. A value of --wait stands after a sign alone: what follows it is the
@@ -119,6 +133,7 @@ int mainProgram(int argc, const char* const* argv) {
     context.socket.sockets = {options.socket};
   }
   context.socket.timeout = milliseconds(options.timeout);
+  context.terminal = terminalOf(currentTerminal(), colorChoice(options.color), options.quiet);
   if (options.wait) {
     if (const int status = waitForService(context.socket, milliseconds(*options.wait)); status != kSuccess) {
       return status;

@@ -1,0 +1,112 @@
+#include <unistd.h>
+
+#include <CLI/CLI.hpp>
+#include <memory>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "tools/ctl/Command.h"
+#include "tools/ctl/EventText.h"
+#include "tools/ctl/Output.h"
+#include "tools/ctl/sessions/SessionCommand.h"
+#include "tools/ctl/sessions/SessionEvents.h"
+#include "tools/ctl/sessions/SessionScript.h"
+#include "tools/ctl/sessions/SessionStory.h"
+#include "tools/ctl/sessions/SessionTable.h"
+#include "tools/ctl/sessions/SessionTrace.h"
+
+namespace tarn::ctl {
+
+namespace {
+
+using recorder::SessionReader;
+using recorder::SessionRow;
+
+struct Arguments {
+  std::int64_t session = 0;
+  std::string format;
+};
+
+int printLines(const std::vector<std::string>& lines) {
+  Output output(STDOUT_FILENO);
+  for (const std::string& line : lines) {
+    if (!output.line(line)) break;
+  }
+  return output.status();
+}
+
+// One object over many lines: what `show` tells, and then every event, so that it is never in memory as a whole.
+int printJson(SessionReader& reader, const SessionRow& row) {
+  const Result<SessionStory> story = storyOf(reader, row, currentTime());
+  if (story.failed()) return sessionFailure(row.id, story.error);
+  Output output(STDOUT_FILENO);
+  std::string line = storyJson(story.value);
+  line.pop_back();
+  output.line(line + ",\"events\":[");
+  line.clear();
+  const Status read = eachEvent(reader.file(), row.id, 0, [&](recorder::EventRow&& event) {
+    if (!line.empty()) {
+      output.line(line + ",");
+    }
+    line = eventJson(event, true);
+    return output.good();
+  });
+  if (read.failed()) return sessionFailure(row.id, read);
+  if (!line.empty()) {
+    output.line(line);
+  }
+  output.line("]}");
+  return output.status();
+}
+
+int printScript(const SessionRow& row, const std::vector<recorder::PeriodRow>& periods,
+                const std::vector<SessionMessage>& messages) {
+  const SessionScript script = scriptOf(row, periods, messages);
+  const int status = printLines(script.lines);
+  for (const std::int64_t event : script.leftOut) {
+    complain("the message of event " + std::to_string(event) + " can't be said in a script; it is left out");
+  }
+  return script.leftOut.empty() ? status : kFailure;
+}
+
+int exportSession(const Context& context, const Arguments& arguments) {
+  return withSession(context, arguments.session, [&](SessionReader& reader, const SessionRow& row) {
+    if (arguments.format == "json") return printJson(reader, row);
+    const auto periods = reader.periods(row.id);
+    if (periods.failed()) return sessionFailure(row.id, periods.error);
+    const auto messages = messagesOf(reader.file(), row.id);
+    if (messages.failed()) return sessionFailure(row.id, messages.error);
+    if (arguments.format == "csv") return printLines(tableOf(messages.value));
+    if (arguments.format == "trace") return printLines(traceOf(row, periods.value, messages.value, currentTime()));
+    return printScript(row, periods.value, messages.value);
+  });
+}
+
+}  // namespace
+
+void addExportCommand(CLI::App& app, Context& context) {
+  CLI::App* command = app.add_subcommand("export", "Print a session for other programs, or to be played again");
+  const auto arguments = std::make_shared<Arguments>();
+  addSessionArgument(*command, arguments->session);
+  command->add_option("--format", arguments->format, "json, csv, trace or script")
+      ->required()
+      ->type_name("FORMAT")
+      ->check(CLI::IsMember({"json", "csv", "trace", "script"}));
+  command->footer(
+      "\n  json    what \"show --json\" tells, and all its events\n"
+      "  csv     its messages, a row each, with a column for each key\n"
+      "  trace   its timeline as a Chrome trace, which the usual viewers of traces open\n"
+      "  script  its messages, starts and stops for \"run\", which derives the same of them: stamps are kept. "
+      "Repeated\n"
+      "          messages are not in it, nor is what the service itself derived. A stamp that is more than a year old\n"
+      "          when it is played is replaced by the service.\n"
+      "Reads the recorder in the state directory; the service need not run.\n\n"
+      "Examples:\n"
+      "  tarnreportingctl export 12 --format trace > session.json\n"
+      "  tarnreportingctl export 12 --format script | tarnreportingctl run");
+  command->callback(
+      [&context, arguments] { context.chosen = [&context, arguments] { return exportSession(context, *arguments); }; });
+}
+
+}  // namespace tarn::ctl

@@ -1,0 +1,127 @@
+#include "tools/ctl/sessions/SessionOverview.h"
+
+#include <algorithm>
+#include <array>
+#include <cmath>
+#include <cstdio>
+#include <utility>
+
+#include "tools/ctl/sessions/JsonObject.h"
+#include "tools/ctl/sessions/SessionEvents.h"
+#include "tools/ctl/sessions/SessionMessage.h"
+
+namespace tarn::ctl {
+
+namespace {
+
+using recorder::EventRow;
+using recorder::PeriodRow;
+using recorder::SessionReader;
+using recorder::SessionRow;
+
+constexpr const char* kSummaryEvent = "sys.oxbow.tarnkit.Session_Generic.Summary";
+constexpr const char* kOverload = R"("issue_type":"overload")";
+
+// A session that was killed has periods that nobody closed.
+double endOf(const PeriodRow& period, const SessionRow& session, double now) {
+  return period.stopped.value_or(session.ended.value_or(now));
+}
+
+bool isRunning(const SessionOverview& overview) {
+  return !overview.row.ended && !overview.periods.empty() && !overview.periods.back().stopped;
+}
+
+// What the newest summary says counts for all before it. When it was made at the end nothing comes after it; else the
+// events after it are gone through.
+Status countOverloads(SessionReader& reader, SessionOverview& overview) {
+  std::int64_t after = 0;
+  bool isAtTheEnd = false;
+  for (auto period = overview.periods.rbegin(); period != overview.periods.rend() && after == 0; ++period) {
+    if (!period->stopped || !period->firstEvent || !period->lastEvent) continue;
+    const auto row = reader.newest(overview.row.id, kSummaryEvent, *period->firstEvent, *period->lastEvent);
+    if (row.failed()) return row.error;
+    if (const auto summary = row.value ? messageOf(*row.value) : std::nullopt) {
+      overview.overloads = summary->payload.get("overload_count").asInt64();
+      after = summary->event;
+      isAtTheEnd = overview.row.ended && period == overview.periods.rbegin();
+    }
+  }
+  if (isAtTheEnd) return {};
+  MessageSieve sieve;
+  return eachEvent(reader.file(), overview.row.id, after, [&](EventRow&& row) {
+    // Most have no such thing, which is seen without reading them.
+    const bool isNews = sieve.letsThrough(row) && row.payload.find(kOverload) != std::string::npos;
+    const auto message = isNews ? messageOf(row) : std::nullopt;
+    overview.overloads += message && isOverload(*message) ? 1 : 0;
+    return true;
+  });
+}
+
+}  // namespace
+
+std::string SessionOverview::state() const {
+  if (!row.ended) return isRunning(*this) ? "running" : "open";
+  return row.endReason;
+}
+
+Result<std::vector<SessionOverview>> overviewsOf(SessionReader& reader, std::vector<SessionRow> sessions, double now) {
+  Result<std::vector<SessionOverview>> made;
+  if (sessions.empty()) return made;
+  const std::int64_t first = sessions.front().id;
+  const std::int64_t last = sessions.back().id;
+  Result<std::vector<PeriodRow>> periods = reader.periods(first, last);
+  if (periods.failed()) return {{}, periods.error};
+  auto period = periods.value.begin();
+  for (SessionRow& row : sessions) {
+    SessionOverview overview;
+    overview.row = std::move(row);
+    period =
+        std::find_if(period, periods.value.end(), [&](const auto& each) { return each.session >= overview.row.id; });
+    for (; period != periods.value.end() && period->session == overview.row.id; ++period) {
+      overview.active += std::max(0.0, endOf(*period, overview.row, now) - period->started);
+      overview.messages += period->messages;
+      overview.redundant += period->redundant;
+      overview.periods.push_back(*period);
+    }
+    made.error = countOverloads(reader, overview);
+    if (made.failed()) return made;
+    made.value.push_back(std::move(overview));
+  }
+  return made;
+}
+
+std::string overviewJson(const SessionOverview& overview) {
+  const SessionRow& row = overview.row;
+  JsonObject object;
+  object.add("id", row.id).add("run", row.run).add("reporter", row.reporter).add("connection", row.connection);
+  object.add("pid", row.pid).add("uid", row.uid).addOrNull("process", row.process);
+  object.addOrNull("application", row.application).add("service_type", row.serviceType);
+  object.addOrNull("service_name", row.serviceName).add("created", row.created).addOptional("ended", row.ended);
+  object.addOrNull("end_reason", row.ended ? row.endReason : std::string());
+  object.add("running", isRunning(overview)).add("active", overview.active);
+  std::vector<std::string> periods;
+  for (const PeriodRow& period : overview.periods) {
+    JsonObject item;
+    item.add("started", period.started).addOptional("stopped", period.stopped).add("messages", period.messages);
+    item.add("redundant", period.redundant).addOptional("first_event", period.firstEvent);
+    item.addOptional("last_event", period.lastEvent);
+    periods.push_back(item.text());
+  }
+  object.addArray("periods", periods).add("messages", overview.messages).add("redundant", overview.redundant);
+  return object.add("overloads", overview.overloads).text();
+}
+
+std::string durationText(double seconds) {
+  std::array<char, 48> text{};
+  const auto whole = static_cast<long long>(std::clamp(std::round(seconds), 0.0, 1e15));
+  if (seconds < 59.95) {
+    std::snprintf(text.data(), text.size(), "%.1f s", std::max(0.0, seconds));
+  } else if (whole < 3600) {
+    std::snprintf(text.data(), text.size(), "%lld min %02lld s", whole / 60, whole % 60);
+  } else {
+    std::snprintf(text.data(), text.size(), "%lld h %02lld min", whole / 3600, whole % 3600 / 60);
+  }
+  return text.data();
+}
+
+}  // namespace tarn::ctl
