@@ -49,6 +49,15 @@ void addLintCommand(CLI::App& app, Context& context);
 void addExplainCommand(CLI::App& app, Context& context);
 // Compares the recorded events with their checksums; changes nothing.
 void addCheckCommand(CLI::App& app, Context& context);
+// Shows the open sessions, what waits and the ledger, again and again (views/TopLoop).
+void addTopCommand(CLI::App& app, Context& context);
+
+// Lists the sessions that the recorder holds.
+void addSessionsCommand(CLI::App& app, Context& context);
+// Tells what one of them did, on one screen.
+void addShowCommand(CLI::App& app, Context& context);
+// Prints one of them for other programs, or as a script.
+void addExportCommand(CLI::App& app, Context& context);
 
 // Lists the sessions that the recorder holds.
 void addSessionsCommand(CLI::App& app, Context& context);

@@ -62,8 +62,10 @@ ROOMS = {
     "testing": BASE + ("service/vocabulary", "testing/backends"),
     "tools/script": PROGRAM,
     "tools/mutate": (),
+    "tools/report": VALUES + ("host/system", "recorder/store"),
     "tools/ctl/terminal": PROGRAM + ("tools/ctl",),
     "tools/ctl/sessions": PROGRAM + ("tools/ctl", "tools/ctl/terminal", "tools/script"),
+    "tools/ctl/views": PROGRAM + ("client", "tools/ctl", "tools/ctl/terminal", "tools/report"),
     "tools/ctl": PROGRAM + ("client", "dictionary", "tools/script", "tools/ctl/sessions", "tools/ctl/terminal"),
     # What checks the service shares no code with it, but for the client and the reader of the recorder's file.
     "tests/scenario": VALUES + ("client", "wire", "recorder/store"),

@@ -1,0 +1,127 @@
+#include "tools/report/ReportStore.h"
+
+#include <limits>
+#include <utility>
+
+#include "tools/report/Message.h"
+
+namespace tarn::report {
+
+namespace {
+
+constexpr std::string_view kSelectSessions =
+    "SELECT id, reporter, pid, uid, process, application, service_name, created, ended, end_reason FROM sessions ";
+constexpr std::string_view kSelectPeriods = "SELECT session, started, stopped, messages, redundant FROM periods ";
+// The first name after all those that begin so.
+constexpr std::string_view kIsMessage =
+    "+backend = 'tally' AND +name >= 'sys.oxbow.tarnkit.' AND +name < 'sys.oxbow.tarnkit/'";
+// A name that counts by itself, or a word without which nothing is an overload.
+constexpr std::string_view kMayCount =
+    "(name = 'sys.oxbow.tarnkit.Volume.Summary' OR name GLOB '*.Error' OR name GLOB '*.IssueDetector' "
+    "OR name GLOB 'sys.oxbow.tarnkit.Error.*' OR name GLOB 'sys.oxbow.tarnkit.*_Error.*' "
+    "OR instr(payload, 'overload') > 0)";
+
+std::optional<double> realOrNothing(const recorder::Statement& row, int column) {
+  return row.isNull(column) ? std::nullopt : std::optional<double>(row.real(column));
+}
+
+SessionRow sessionRow(const recorder::Statement& row) {
+  SessionRow session;
+  session.id = row.integer(0);
+  session.reporter = row.integer(1);
+  session.pid = row.integer(2);
+  session.uid = row.integer(3);
+  session.process = row.text(4);
+  session.application = row.text(5);
+  session.serviceName = row.text(6);
+  session.created = row.real(7);
+  session.ended = realOrNothing(row, 8);
+  session.endReason = row.text(9);
+  return session;
+}
+
+PeriodRow periodRow(const recorder::Statement& row) {
+  PeriodRow period;
+  period.session = row.integer(0);
+  period.started = row.real(1);
+  period.stopped = realOrNothing(row, 2);
+  period.messages = row.integer(3);
+  period.redundant = row.integer(4);
+  return period;
+}
+
+std::string listOf(const std::vector<std::int64_t>& ids) {
+  std::string list = "(";
+  for (const std::int64_t id : ids) {
+    list += (list.size() > 1 ? "," : "") + std::to_string(id);
+  }
+  return list + ")";
+}
+
+}  // namespace
+
+Status ReportStore::each(const std::string& sql, const TimeRange& range, const StoreMoment::Take& take) {
+  constexpr double kEver = std::numeric_limits<double>::infinity();
+  const auto bind = [&](recorder::Statement& rows) {
+    rows.bind(1, range.since.value_or(-kEver)).bind(2, range.until.value_or(kEver));
+  };
+  return moment_.each(sql, bind, take);
+}
+
+Result<std::vector<SessionRow>> ReportStore::sessions(const TimeRange& range) {
+  Result<std::vector<SessionRow>> read;
+  read.error = each(std::string(kSelectSessions) + "WHERE created < ?2 AND coalesce(ended, ?1) >= ?1 ORDER BY id",
+                    range, [&](const recorder::Statement& row) { read.value.push_back(sessionRow(row)); });
+  return read;
+}
+
+Result<std::vector<SessionRow>> ReportStore::sessionsOf(const std::vector<std::int64_t>& ids) {
+  Result<std::vector<SessionRow>> read;
+  read.error = each(std::string(kSelectSessions) + "WHERE id IN " + listOf(ids) + " ORDER BY id", {},
+                    [&](const recorder::Statement& row) { read.value.push_back(sessionRow(row)); });
+  return read;
+}
+
+Result<std::vector<PeriodRow>> ReportStore::periods(const TimeRange& range) {
+  Result<std::vector<PeriodRow>> read;
+  read.error = each(std::string(kSelectPeriods) + "WHERE started < ?2 AND coalesce(stopped, ?1) >= ?1 ORDER BY id",
+                    range, [&](const recorder::Statement& row) { read.value.push_back(periodRow(row)); });
+  return read;
+}
+
+Status ReportStore::countedEvents(const TimeRange& range, const std::function<void(const EventRow&)>& take) {
+  EventRow event;
+  const std::string sql =
+      "SELECT id, session, time, backend, name, payload FROM events WHERE session IS NOT NULL AND "
+      "time >= ?1 AND time < ?2 AND " +
+      std::string(kIsMessage) + " AND " + std::string(kMayCount);
+  return each(sql, range, [&](const recorder::Statement& row) {
+    event.id = row.integer(0);
+    event.session = row.integer(1);
+    event.time = row.real(2);
+    event.backend = row.text(3);
+    event.name = row.text(4);
+    event.payload = row.text(5);
+    take(event);
+  });
+}
+
+Result<std::map<std::int64_t, std::vector<EventRow>>> ReportStore::eventsOf(const std::vector<std::int64_t>& ids) {
+  Result<std::map<std::int64_t, std::vector<EventRow>>> read;
+  const std::string sql = "SELECT id, session, time, backend, name, CASE WHEN " + std::string(kIsMessage) +
+                          " THEN payload END FROM events WHERE session IN " + listOf(ids) + " ORDER BY id";
+  read.error = each(sql, {}, [&](const recorder::Statement& row) {
+    read.value[row.integer(1)].push_back({row.integer(0), row.integer(1), row.real(2), std::string(row.text(3)),
+                                          std::string(row.text(4)), std::string(row.text(5))});
+  });
+  return read;
+}
+
+Result<std::map<std::int64_t, std::vector<PeriodRow>>> ReportStore::periodsOf(const std::vector<std::int64_t>& ids) {
+  Result<std::map<std::int64_t, std::vector<PeriodRow>>> read;
+  read.error = each(std::string(kSelectPeriods) + "WHERE session IN " + listOf(ids) + " ORDER BY id", {},
+                    [&](const recorder::Statement& row) { read.value[row.integer(0)].push_back(periodRow(row)); });
+  return read;
+}
+
+}  // namespace tarn::report
