@@ -58,7 +58,7 @@ void addOptions(CLI::App& app, RawOptions& raw) {
       ->type_name("FILE")
       ->check(checkNotEmpty);
   app.add_option("--device-properties", raw.devicePropertiesFile,
-                 "What the device is, JSON (default: none, which is {\"InternalBuild\": false, \"haptics\": false})")
+                 R"(What the device is, JSON (default: none, which is {"InternalBuild": false, "haptics": false}))")
       ->type_name("FILE")
       ->check(checkNotEmpty);
   app.add_option("--log-level", raw.logLevel,
