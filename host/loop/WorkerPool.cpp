@@ -82,7 +82,7 @@ void WorkerPool::destroyWhatIsLeft() {
   suspensions_.clear();
 }
 
-void WorkerPool::add(const std::shared_ptr<Line>& line, platform::Work work, Urgency urgency) {
+void WorkerPool::add(const std::shared_ptr<Line>& line, platform::Work&& work, Urgency urgency) {
   const MutexLock lock(mutex_);
   if (over_) return;
   enqueue(line, std::move(work));
@@ -171,7 +171,7 @@ bool WorkerPool::settle(nanoseconds longest) {
                           [this]() TARN_REQUIRES(mutex_) { return unfinished_ == 0; });
 }
 
-void WorkerPool::enqueue(const std::shared_ptr<Line>& line, platform::Work work) {
+void WorkerPool::enqueue(const std::shared_ptr<Line>& line, platform::Work&& work) {
   line->incoming.push_back(std::move(work));
   line->waiting.fetch_add(1, std::memory_order_relaxed);
   countUnfinished();
