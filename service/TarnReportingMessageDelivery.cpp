@@ -46,18 +46,18 @@ void TarnReportingMessageDelivery::begin(std::int32_t processIdentifier,
   plist::Array storage;
   kLog(LogLevel::Debug, "sending message for reporter %@", [&] { return textOf(search_.reporterIDs, storage); });
   TarnReportingFacilities().tracePoints.emit(kTraceSend, processIdentifier);
-  if (const auto delegate = service.lock(); !delegate || !delegate->isReportingEnabled()) {
+  const auto delegate = service.lock();
+  if (!delegate || !delegate->isReportingEnabled()) {
     account_.close(TarnReportingOutcome::Refused);
     reply_(platform::RemoteError{kErrorDomain, kReportingDisabled, "reporting is disabled"});
     return;
   }
-  proceed(service);
+  proceed(*delegate, service);
 }
 
-void TarnReportingMessageDelivery::proceed(const std::weak_ptr<TarnReportingServiceDelegateProtocol>& delegate) {
-  const auto service = delegate.lock();
-  if (!service) return;
-  found_ = found_ || service->findNextSessions(search_);
+void TarnReportingMessageDelivery::proceed(TarnReportingServiceDelegateProtocol& service,
+                                           const std::weak_ptr<TarnReportingServiceDelegateProtocol>& delegate) {
+  found_ = found_ || service.findNextSessions(search_);
   if (!found_) {
     giveWay(delegate);
     return;
@@ -77,7 +77,11 @@ void TarnReportingMessageDelivery::proceed(const std::weak_ptr<TarnReportingServ
 }
 
 void TarnReportingMessageDelivery::giveWay(const std::weak_ptr<TarnReportingServiceDelegateProtocol>& delegate) {
-  TarnReportingContinueLater([delegate, rest = std::move(*this)]() mutable { rest.proceed(delegate); });
+  TarnReportingContinueLater([delegate, rest = std::move(*this)]() mutable {
+    if (const auto service = delegate.lock()) {
+      rest.proceed(*service, delegate);
+    }
+  });
 }
 
 void TarnReportingMessageDelivery::handOver(const std::shared_ptr<TarnReportingSession>& session, bool isLast) {

@@ -50,7 +50,8 @@ class TarnReportingMessageDelivery {
 
  private:
   // One slice: goes on with the search, then with the handing over, until it is done or others are to have their turn.
-  void proceed(const std::weak_ptr<TarnReportingServiceDelegateProtocol>& delegate);
+  void proceed(TarnReportingServiceDelegateProtocol& service,
+               const std::weak_ptr<TarnReportingServiceDelegateProtocol>& delegate);
   // Hands itself over as the work of the next slice; nothing of this object may be touched afterwards.
   void giveWay(const std::weak_ptr<TarnReportingServiceDelegateProtocol>& delegate);
   // Makes the session's record and calls its intake. The last one's record takes the message itself.

@@ -115,7 +115,12 @@ void TarnReportingSession::addAppName(TarnReportingSessionMessage& message) cons
   plist::Dictionary& payload = message.mutableMessage();
   const plist::ValueView present = payload.get(keys::kHostApplicationDisplayID);
   if (present && !(present == plist::ValueView("Unknown"))) return;
-  payload.set(keys::kHostApplicationDisplayID, TarnReportingUtilityRetrieveAppName(configuration_));
+  const plist::ValueView known = configuration_.get(keys::kHostApplicationDisplayID);
+  if (known.isText()) {  // as it lies there: every message comes by
+    payload.set(keys::kHostApplicationDisplayID, known);
+  } else {
+    payload.set(keys::kHostApplicationDisplayID, TarnReportingUtilityRetrieveAppName(configuration_));
+  }
 }
 
 bool TarnReportingSession::messageIsRedundant(const TarnReportingSessionMessage& message) const {

@@ -83,7 +83,7 @@ void WorkerPool::destroyWhatIsLeft() {
   suspensions_.clear();
 }
 
-void WorkerPool::add(const std::shared_ptr<Line>& line, platform::Work work, Urgency urgency) {
+void WorkerPool::add(const std::shared_ptr<Line>& line, platform::Work&& work, Urgency urgency) {
   const MutexLock lock(mutex_);
   if (over_) return;
   enqueue(line, OwnedWork::of(std::move(work)));
@@ -174,7 +174,7 @@ bool WorkerPool::settle(nanoseconds longest) {
                           [this]() TARN_REQUIRES(mutex_) { return unfinished_ == 0; });
 }
 
-void WorkerPool::enqueue(const std::shared_ptr<Line>& line, OwnedWork work) {
+void WorkerPool::enqueue(const std::shared_ptr<Line>& line, OwnedWork&& work) {
   line->incoming.push_back(std::move(work));
   line->waiting.fetch_add(1, std::memory_order_relaxed);
   if (line->suspension) {

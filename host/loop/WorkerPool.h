@@ -72,7 +72,7 @@ class WorkerPool {
   enum class Urgency { Gathered, AtOnce };
   // Runs `work` as that of this line, after what the line was given before, for the session that the caller works for.
   // So it is with all that is handed over.
-  void add(const std::shared_ptr<Line>& line, platform::Work work, Urgency urgency = Urgency::Gathered);
+  void add(const std::shared_ptr<Line>& line, platform::Work&& work, Urgency urgency = Urgency::Gathered);
   // Hands it over once `delay` has passed, not before; at once without one. It counts as unfinished from its moment on.
   void addAfter(const std::shared_ptr<Line>& line, std::chrono::nanoseconds delay, platform::Work work);
   // By work of the line, as its last step: no piece of it begins until resume() or until `longest` has passed; then
@@ -113,7 +113,7 @@ class WorkerPool {
   // ran.
   static std::size_t runTurn(Line& line, OwnedWork next);
   // Puts work into the line and the line, unless it is there, is run or is suspended, at the end of the pool's.
-  void enqueue(const std::shared_ptr<Line>& line, OwnedWork work) TARN_REQUIRES(mutex_);
+  void enqueue(const std::shared_ptr<Line>& line, OwnedWork&& work) TARN_REQUIRES(mutex_);
   void schedule(const std::shared_ptr<Line>& line) TARN_REQUIRES(mutex_);
   // The line may stand in the pool's line again; its `next` counts as waiting from here on.
   void endSuspension(Suspensions::iterator suspension) TARN_REQUIRES(mutex_);

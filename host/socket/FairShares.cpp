@@ -32,20 +32,22 @@ std::shared_ptr<ShareParty> FairShares::partyOf(std::uint32_t user) {
   return party;
 }
 
-void FairShares::ready(const std::shared_ptr<ShareHolder>& holder) noexcept {
+void FairShares::ready(std::shared_ptr<ShareHolder> holder) noexcept {
   if (std::exchange(holder->queued_, true)) return;
   const std::shared_ptr<ShareParty>& party = holder->party_;
-  join(holder->credit_ < 0 ? party->seats : party->fresh, holder);
   if (!std::exchange(party->queued, true)) {
     party->credit = std::min(party->credit + kQuantum, kQuantum);
     party->place.front() = party;
     parties_.splice(parties_.end(), party->place);
   }
+  Holders& line = holder->credit_ < 0 ? party->seats : party->fresh;
+  join(line, std::move(holder));
 }
 
-void FairShares::join(Holders& line, const std::shared_ptr<ShareHolder>& holder) noexcept {
-  holder->place_.front() = holder;
-  line.splice(line.end(), holder->place_);
+void FairShares::join(Holders& line, std::shared_ptr<ShareHolder> holder) noexcept {
+  std::list<std::shared_ptr<ShareHolder>>& place = holder->place_;
+  place.front() = std::move(holder);
+  line.splice(line.end(), place);
 }
 
 std::shared_ptr<ShareHolder> FairShares::takeFirst(Holders& line) noexcept {
@@ -63,30 +65,30 @@ void FairShares::leave(const std::shared_ptr<ShareParty>& party) noexcept {
 
 // One turn of the first user's next seat; its cost. Both go to the end of their lines when their credit is spent.
 std::int64_t FairShares::serveOne() {
-  const std::shared_ptr<ShareParty> party = parties_.front();
-  if (party->credit <= 0) {
-    party->credit += kQuantum;
+  ShareParty& party = *parties_.front();
+  if (party.credit <= 0) {
+    party.credit += kQuantum;
     passOver();
     return parties_.size() == 1 ? 0 : 1;
   }
-  const bool takesFresh = !party->fresh.empty() && (party->seats.empty() || party->freshTurns < kFreshTurns);
-  party->freshTurns = takesFresh ? party->freshTurns + 1 : 0;
-  const std::shared_ptr<ShareHolder> holder = takeFirst(takesFresh ? party->fresh : party->seats);
+  const bool takesFresh = !party.fresh.empty() && (party.seats.empty() || party.freshTurns < kFreshTurns);
+  party.freshTurns = takesFresh ? party.freshTurns + 1 : 0;
+  const std::shared_ptr<ShareHolder> holder = takeFirst(takesFresh ? party.fresh : party.seats);
   holder->credit_ = std::min(holder->credit_ + kQuantum, kQuantum);
   if (holder->credit_ <= 0) {
-    join(party->seats, holder);
+    join(party.seats, holder);
     return 1;
   }
   holder->queued_ = false;  // what comes for it while it is served counts as more
-  const ShareHolder::Turn turn = serve(*party, *holder);
-  noteDone(*party, turn.cost);
+  const ShareHolder::Turn turn = serve(party, *holder);
+  noteDone(party, turn.cost);
   holder->credit_ = std::max(holder->credit_ - turn.cost, -kMostDebt);
-  party->credit = std::max(party->credit - turn.cost, -kMostDebt);
+  party.credit = std::max(party.credit - turn.cost, -kMostDebt);
   if (turn.more && !std::exchange(holder->queued_, true)) {
-    join(party->seats, holder);
+    join(party.seats, holder);
   }
-  if (party->fresh.empty() && party->seats.empty()) {
-    leave(party);
+  if (party.fresh.empty() && party.seats.empty()) {
+    leave(holder->party_);
   }
   return std::max<std::int64_t>(turn.cost, 1);
 }

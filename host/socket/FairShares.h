@@ -126,7 +126,7 @@ class FairShares {
   // then.
   std::shared_ptr<ShareParty> partyOf(std::uint32_t user);
   // Something came for the holder to do. Cheap when it waits for a turn already.
-  void ready(const std::shared_ptr<ShareHolder>& holder) noexcept;
+  void ready(std::shared_ptr<ShareHolder> holder) noexcept;
   // Gives turns until they cost `budget` or more, or nobody has anything to do. `mayServe(party)` is asked before each
   // turn of a user; one that may not keeps its place and its credit. Whether somebody is left who could go on at once.
   template <class MayServe>
@@ -170,7 +170,7 @@ class FairShares {
   void passOver() noexcept;
   std::int64_t latelyOf(const ShareParty& party) const noexcept;
   void noteDone(ShareParty& party, std::int64_t cost) noexcept;
-  static void join(Holders& line, const std::shared_ptr<ShareHolder>& holder) noexcept;
+  static void join(Holders& line, std::shared_ptr<ShareHolder> holder) noexcept;
   static std::shared_ptr<ShareHolder> takeFirst(Holders& line) noexcept;
   void leave(const std::shared_ptr<ShareParty>& party) noexcept;
 

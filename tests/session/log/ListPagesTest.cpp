@@ -205,12 +205,19 @@ TEST_F(ListPages, WalkPassesOverALostPage) {
 }
 
 TEST_F(ListPages, WalkKeepsMessagesInTheirPlaces) {
+  setBounds(kNoBound, 40 * kKilobyte);
   List list;
-  fill(list, 3);
-  ASSERT_EQ(list.overflowed(), 0U);
+  fill(list, 30);
   List other;
-  list.forEach([&](std::size_t, const Record&) { fill(other, 30); }, [] {});
-  EXPECT_EQ(list.overflowed(), 0U);
+  std::size_t overflowed = 0;
+  list.forEach(
+      [&](std::size_t, const Record&) {
+        fill(other, 1);  // the two get larger than the bound, and the list is the larger one
+        overflowed += list.overflowed();
+      },
+      [] {});
+  EXPECT_EQ(overflowed, 0U);
+  EXPECT_GT(other.overflowed(), 0U);
 }
 
 }  // namespace
