@@ -51,9 +51,10 @@ TEST_F(SessionEventsTest, WhoHasEnoughGetsNoMore) {
 
 TEST_F(SessionEventsTest, AFileThatCannotBeReadIsAnError) {
   makeStore();
-  sql("DROP TABLE events; CREATE TABLE events(id INTEGER PRIMARY KEY, session INTEGER);");
+  addEvent(1, 1, "tally", "a", "{}");
+  sql("DROP TABLE event_texts;");
   const Status read = eachEvent(file(), 1, 0, [](recorder::EventRow&&) { return true; });
-  EXPECT_EQ(read.text(), file().string() + ": no such column: time");
+  EXPECT_TRUE(read.text().starts_with(file().string() + ": no such table: ")) << read.text();
 }
 
 bool letsThrough(MessageSieve& sieve, const std::string& name, const std::string& payload,

@@ -17,7 +17,6 @@ namespace tarn::testing {
 
 class SessionStoreFixture : public ::testing::Test {
  protected:
-  enum class Events { Table, View };
   // A session of the music player's; tests change what they are about.
   struct Session {
     std::int64_t id = 1;
@@ -48,7 +47,7 @@ class SessionStoreFixture : public ::testing::Test {
   std::filesystem::path file() const { return directory_ / "recorder.sqlite3"; }
 
   // The tables of the version with sessions.
-  void makeStore(Events events = Events::Table) {
+  void makeStore() {
     sql("PRAGMA user_version = 1;"
         "CREATE TABLE runs(id INTEGER PRIMARY KEY, boot TEXT, version TEXT, started REAL, ended REAL, end_reason TEXT);"
         "CREATE TABLE sessions(id INTEGER PRIMARY KEY, run INTEGER, reporter INTEGER, connection INTEGER, pid INTEGER,"
@@ -56,21 +55,22 @@ class SessionStoreFixture : public ::testing::Test {
         " ended REAL, end_reason TEXT);"
         "CREATE TABLE periods(id INTEGER PRIMARY KEY, session INTEGER, started REAL, stopped REAL, messages INTEGER,"
         " redundant INTEGER, first_event INTEGER, last_event INTEGER);"
+        "CREATE TABLE event_rows(id INTEGER PRIMARY KEY, time REAL, kind INTEGER, payload INTEGER, cut INTEGER,"
+        " session INTEGER);"
+        "CREATE TABLE event_texts(id INTEGER PRIMARY KEY, backend TEXT, name TEXT, text TEXT);"
+        "CREATE TABLE event_times(block INTEGER PRIMARY KEY, earliest REAL, latest REAL);"
+        "CREATE TABLE session_spans(session INTEGER, first INTEGER, PRIMARY KEY(session, first)) WITHOUT ROWID;"
+        "CREATE VIEW events AS SELECT r.id AS id, r.time AS time, k.backend AS backend, k.name AS name,"
+        " p.text AS payload, k.text AS detail, r.session AS session FROM event_rows AS r"
+        " CROSS JOIN event_texts AS k ON k.id = 2 * (r.id - r.kind) + 1"
+        " LEFT JOIN event_texts AS p ON p.id = 2 * (r.id - r.payload);"
+        "CREATE TRIGGER keep INSTEAD OF INSERT ON events BEGIN"
+        " INSERT INTO event_texts VALUES(2 * new.id, NULL, NULL, new.payload),"
+        "  (2 * new.id + 1, new.backend, new.name, new.detail);"
+        " INSERT INTO event_rows VALUES(new.id, new.time, 0, 0, NULL, new.session);"
+        " INSERT INTO session_spans SELECT new.session, new.id WHERE new.session IS NOT NULL;"
+        "END;"
         "INSERT INTO runs VALUES(1, 'boot', '0.1.0', 1795150000, NULL, NULL);");
-    if (events == Events::Table) {
-      sql(std::string("CREATE TABLE events") + kEventColumns + ";CREATE INDEX by_session ON events(session);");
-    } else {
-      sql("CREATE TABLE kept(id INTEGER PRIMARY KEY, time REAL, backend TEXT, name TEXT, payload INTEGER, detail TEXT,"
-          " session INTEGER);"
-          "CREATE TABLE payloads(id INTEGER PRIMARY KEY, text TEXT UNIQUE);"
-          "CREATE VIEW events AS SELECT kept.id AS id, time, backend, name, payloads.text AS payload, detail, session"
-          " FROM kept JOIN payloads ON payloads.id = kept.payload;"
-          "CREATE TRIGGER keep INSTEAD OF INSERT ON events BEGIN"
-          " INSERT OR IGNORE INTO payloads(text) VALUES(new.payload);"
-          " INSERT INTO kept VALUES(new.id, new.time, new.backend, new.name,"
-          "  (SELECT id FROM payloads WHERE text = new.payload), new.detail, new.session);"
-          "END;");
-    }
   }
   // Of the version before there were sessions.
   void makeOldStore() {
@@ -113,15 +113,13 @@ class SessionStoreFixture : public ::testing::Test {
   void sql(const std::string& text) {
     if (database_ == nullptr) {
       ASSERT_EQ(sqlite3_open(file().c_str(), &database_), SQLITE_OK);
+      sql("PRAGMA synchronous = OFF;");  // nobody pulls the plug here
     }
     ASSERT_EQ(sqlite3_exec(database_, text.c_str(), nullptr, nullptr, nullptr), SQLITE_OK)
         << sqlite3_errmsg(database_) << " in " << text;
   }
 
  private:
-  static constexpr const char* kEventColumns =
-      "(id INTEGER PRIMARY KEY, time REAL, backend TEXT, name TEXT, payload TEXT, detail TEXT, session INTEGER)";
-
   static std::string quoted(std::string_view text) {
     std::string result = "'";
     for (const char c : text) {

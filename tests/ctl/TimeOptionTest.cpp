@@ -141,6 +141,12 @@ TEST_F(UserTimeZone, YesterdayBeginsAtItsMidnightWhenTheClocksChangeBetween) {
   EXPECT_EQ(parsed("yesterday", midnight + 24.5 * kHour), midnight - kDay);
 }
 
+TEST_F(UserTimeZone, YesterdayIsTheDayBeforeEvenWhenThatWasAShortOne) {
+  // 2026-03-29 has 23 hours.
+  const double midnight = 1774738800;  // 2026-03-29 00:00, in winter
+  EXPECT_EQ(parsed("yesterday", midnight + 23 * kHour + 600), midnight);
+}
+
 TEST_F(UserTimeZone, HasNoDaysThatTheCalendarDoesNotHave) {
   EXPECT_TRUE(parseTime("2026-02-30", kNow, userTimeZone()).failed());
   EXPECT_TRUE(parseTime("2026-13-01", kNow, userTimeZone()).failed());

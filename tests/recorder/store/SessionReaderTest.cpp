@@ -206,7 +206,7 @@ TEST_F(SessionReaderOpenTest, AFileThatMayNotBeReadIsSaidToRefuse) {
 class SessionReaderViewTest : public testing::SessionStoreFixture {};
 
 TEST_F(SessionReaderViewTest, ReadsEventsThatAreAView) {
-  makeStore(Events::View);
+  makeStore();
   addMessage(5, 1000, "Playback.Start", R"({"n":1})");
   SessionReader reader(file());
   ASSERT_TRUE(reader.open().ok());
@@ -218,7 +218,7 @@ TEST_F(SessionReaderViewTest, ReadsEventsThatAreAView) {
 
 TEST_F(SessionReaderViewTest, AViewThatNeverEndsIsGivenUp) {
   makeStore();
-  sql("DROP TABLE events; CREATE VIEW events AS WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n)"
+  sql("DROP VIEW events; CREATE VIEW events AS WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n)"
       " SELECT i AS id, 0 AS time, 'tally' AS backend, 'n' || i % 2 AS name, '' AS payload, '' AS detail,"
       " i % 2 + 5 AS session FROM n;");
   SessionReader reader(file());
