@@ -40,7 +40,7 @@ bool MessageSieve::letsThrough(const recorder::EventRow& row) {
   if (row.backend != "tally") return true;
   const std::string_view kind = kindOf(row.name);
   const bool isFirst = row.name.starts_with(kFirstPrefix) && !kind.empty();
-  const bool repeats = !isFirst && !kind.empty() && kind == kind_;
+  const bool repeats = !isFirst && !kind.empty() && kind == kind_ && row.payload == payload_;
   kind_ = isFirst ? kind : std::string_view();
   payload_ = isFirst ? row.payload : std::string();
   return !repeats;
