@@ -100,6 +100,7 @@ TEST_F(MainLoopTest, WhatRunsOutOfMemoryEndsAloneAndTheLoopGoesOn) {
   });
   EXPECT_TRUE(eventually([&] { return counter_->flushes == 1; }));
   running_.onQueue([&] { running_.loop.unwatch(ours_.get()); });
+  running_.stop();  // its hook looks at this frame
   EXPECT_TRUE(hookFailed);
 }
 
