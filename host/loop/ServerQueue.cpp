@@ -31,7 +31,7 @@ void ServerQueue::async(platform::Work work) {
   bool wakeServer = false;
   {
     const MutexLock lock(mutex_);
-    incoming_.push_back({OwnedWork::of(std::move(work)), LogClientScope::current()});
+    incoming_.push_back({OwnedWork(std::move(work)), LogClientScope::current()});
     ready_.fetch_add(1, std::memory_order_relaxed);
     wakeServer = mustWake();
   }
@@ -49,7 +49,7 @@ void ServerQueue::asyncAfter(std::chrono::nanoseconds delay, platform::Work work
   bool wakeServer = false;
   {
     const MutexLock lock(mutex_);
-    delayed_.add(deadline, {OwnedWork::of(std::move(work)), {}});
+    delayed_.add(deadline, {OwnedWork(std::move(work)), {}});
     wakeServer = deadline < sleepsUntil_ && mustWake();
   }
   if (wakeServer) {

@@ -47,9 +47,9 @@ class WorkLane {
   bool empty() const noexcept { return pieces() == 0; }
   std::size_t pieces() const noexcept { return pieces_.size() - next_ + (rest_.work ? 1 : 0); }
   // For the session that the caller works for, as that which it puts ahead.
-  void add(platform::Work work) { pieces_.push_back(OwnedWork::of(std::move(work))); }
+  void add(platform::Work work) { pieces_.emplace_back(std::move(work)); }
   // Ahead of what waits. One at a time: the piece that runs gives way once, as the last thing it does.
-  void addNext(platform::Work rest) { rest_ = OwnedWork::of(std::move(rest)); }
+  void addNext(platform::Work rest) { rest_ = OwnedWork(std::move(rest)); }
   // The next piece; only when there is one.
   OwnedWork take() {
     if (rest_.work) return std::move(rest_);

@@ -34,12 +34,15 @@ class WorkOwner {
 
 // A piece of work that waits, and whose it is.
 struct OwnedWork {
+  // No work.
+  OwnedWork() = default;
+  // Work of whoever hands it over.
+  explicit OwnedWork(platform::Work&& handedOver) noexcept : work(std::move(handedOver)), owner(WorkOwner::current()) {}
+
   platform::Work work;
   platform::SessionNumber owner = 0;
 
-  // Of whoever hands it over.
-  static OwnedWork of(platform::Work work) noexcept { return {std::move(work), WorkOwner::current()}; }
-  // Only when there is one.
+  // Only when there is some.
   void operator()() {
     const WorkOwner scope(owner);
     work();

@@ -86,7 +86,7 @@ void WorkerPool::destroyWhatIsLeft() {
 void WorkerPool::add(const std::shared_ptr<Line>& line, platform::Work&& work, Urgency urgency) {
   const MutexLock lock(mutex_);
   if (over_) return;
-  enqueue(line, OwnedWork::of(std::move(work)));
+  enqueue(line, OwnedWork(std::move(work)));
   if (urgency == Urgency::AtOnce && looking_) {
     ended_.notifyOne();
   }
@@ -96,10 +96,10 @@ void WorkerPool::addAfter(const std::shared_ptr<Line>& line, nanoseconds delay, 
   const MutexLock lock(mutex_);
   if (over_) return;
   if (delay <= nanoseconds::zero()) {
-    enqueue(line, OwnedWork::of(std::move(work)));
+    enqueue(line, OwnedWork(std::move(work)));
     return;
   }
-  delayed_.add(deadlineAfter(clock_.monotonic(), delay), Delayed(line, OwnedWork::of(std::move(work))));
+  delayed_.add(deadlineAfter(clock_.monotonic(), delay), Delayed(line, OwnedWork(std::move(work))));
   watchNextMoment();
 }
 
@@ -108,7 +108,7 @@ void WorkerPool::suspend(const std::shared_ptr<Line>& line, nanoseconds longest,
   const auto moment = deadlineAfter(clock_.monotonic(), std::max(longest, nanoseconds::zero()));
   line->suspension = suspensions_.emplace(std::pair(moment, nextSuspension_++), line).first;
   line->interrupted = true;
-  line->next = OwnedWork::of(std::move(next));
+  line->next = OwnedWork(std::move(next));
   line->held = line->taken.size() - line->position + line->incoming.size() + 1;
   held_ += line->held;
   countUnfinished();
@@ -157,7 +157,7 @@ void WorkerPool::afterWhatIsUnfinished(platform::Work done) {
     }
     barrier->left += busy.size();
     for (const std::shared_ptr<Line>& line : busy) {
-      enqueue(line, {[barrier] { barrier->pass(); }});
+      enqueue(line, OwnedWork([barrier] { barrier->pass(); }));
     }
   }
   barrier->pass();

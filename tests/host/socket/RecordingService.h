@@ -8,6 +8,7 @@
 #include <memory>
 #include <new>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "host/loop/ServerQueue.h"
@@ -45,6 +46,7 @@ class RecordingService final : public platform::ListenerDelegate,
   std::vector<std::string> events;  // "1 createReportingSession 7", "1 interrupted", "1 invalidated"
   std::vector<Held> heldStarts;     // the reply of every start
   std::vector<std::int32_t> processIdentifiers;
+  std::vector<std::pair<std::int64_t, std::uint32_t>> openers;  // number and user of each connection
   std::vector<std::string> descriptions;
   std::size_t mostWaiting = 0;  // pieces of work that waited when a request came
 

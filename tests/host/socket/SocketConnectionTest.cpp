@@ -140,6 +140,15 @@ TEST_F(SocketConnectionTest, ServesAFrameOfTheLargestSize) {
   EXPECT_TRUE(client.reply());
 }
 
+TEST_F(SocketConnectionTest, TellsItsNumberAndThePeersUser) {
+  TestClient first(path_);
+  first.status();
+  TestClient second(path_);
+  second.status();
+  const std::vector<std::pair<std::int64_t, std::uint32_t>> expected{{1, ::getuid()}, {2, ::getuid()}};
+  EXPECT_EQ(running_.onQueue([this] { return service_->openers; }), expected);
+}
+
 TEST_F(SocketConnectionTest, KnowsThePeersProcess) {
   TestClient client(path_);
   client.status();
