@@ -18,8 +18,10 @@
 #include <vector>
 
 #include "plist/Result.h"
-#include "recorder/store/ChangeWatch.h"
 #include "recorder/store/Connection.h"
+#include "recorder/store/Statement.h"
+#include "recorder/store/StoreCheck.h"
+#include "recorder/store/files/ChangeWatch.h"
 
 namespace tarn::recorder {
 
@@ -29,15 +31,20 @@ struct EventRow {
   double time = 0;  // epoch seconds
   std::string backend;
   std::string name;
-  std::string payload;  // JSON
-  std::string detail;   // JSON
+  std::string payload;                       // JSON
+  std::string detail;                        // JSON
+  std::optional<std::int64_t> session = {};  // on whose behalf it was handed over: `sessions.id`
 };
 
 // Which events; all that is given must hold.
 struct EventQuery {
   std::optional<std::string> backend;
   std::optional<std::string> nameGlob;  // see globMatches
-  std::int64_t after = 0;               // events with greater ids
+  std::optional<std::int64_t> session;  // `sessions.id`
+  // Epoch seconds, the first included, the second not.
+  std::optional<double> since;
+  std::optional<double> until;
+  std::int64_t after = 0;  // events with greater ids
   // Rows of a page at the most.
   std::size_t limit = 1000;
 };
@@ -49,7 +56,8 @@ struct EventPage {
   // Where the next query goes on: the id up to which events were looked at. Less than the query's `after` when the
   // file was replaced by one whose ids start again; its rows are then in this page.
   std::int64_t lookedUpTo = 0;
-  bool more = false;  // the limit cut it short
+  bool more = false;         // the limit cut it short
+  bool hasSessions = false;  // the file knows them; of one that doesn't no event is of any
 };
 
 class EventReader {
@@ -101,6 +109,7 @@ class EventReader {
   Result<EventPage> readOpen(const EventQuery& query);
   // The rows, within the bounds of this read.
   [[nodiscard]] Status readRows(const EventQuery& query, std::int64_t after, EventPage& page);
+  [[nodiscard]] Status readFrom(Statement& rows, const IdRange& ids, std::size_t limit, EventPage& page);
 
   const std::filesystem::path file_;
   // Open from one read to the next, as long as the file stays the same.

@@ -42,7 +42,7 @@ class StoreFiles {
   // Of the log in which so many bytes were committed.
   [[nodiscard]] Result<LogState> lookAtLog(std::int64_t bytes);
   // Before a transaction, and in it. Where the log's index is cut, SQLite would take old pages for the newest.
-  void noteIndex() noexcept { indexBytes_ = indexBytes(); }
+  void noteIndex() { indexBytes_ = indexBytes(); }
   [[nodiscard]] Status checkIndex() const;
 
   // Gives the closed file and what belongs to it another name, which is the value.
@@ -57,7 +57,7 @@ class StoreFiles {
 
   [[nodiscard]] Result<Identity> readIdentity() const;
   [[nodiscard]] Status putOddCompanionsAside();
-  std::int64_t indexBytes() const noexcept;
+  std::int64_t indexBytes() const;
   std::filesystem::path companion(const char* suffix) const { return path_.string() + suffix; }
   std::filesystem::path freeName(const std::string& suffix) const;
 
