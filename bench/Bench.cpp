@@ -25,6 +25,7 @@ constexpr Figure kFigures[] = {
     {"stream", &measureStream},
     {"gathered", &measureGathered},
     {"recorded", &measureRecorded},
+    {"queries", &measureQueries},
     {"fleet", &measureFleet},
     {"visible", &measureVisible},
     {"post", &measurePost},

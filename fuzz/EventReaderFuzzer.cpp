@@ -10,7 +10,7 @@
 #include <fstream>
 #include <string>
 
-#include "recorder/store/EventReader.h"
+#include "recorder/store/reading/EventReader.h"
 
 namespace {
 

@@ -11,6 +11,7 @@
 
 #include "host/log/PrefixedLog.h"
 #include "host/loop/Settling.h"
+#include "host/loop/WorkOwner.h"
 #include "host/system/DescriptorLimit.h"
 #include "host/system/Files.h"
 #include "host/system/MemoryReserve.h"
@@ -49,6 +50,7 @@ recorder::RecorderOptions recorderOptions(const HostConfiguration& configuration
   const std::string logs = configuration.paths.diagnosticLogs.value_or(stateDirectory) + "/DiagnosticLogs/Audio/";
   options.folders = {logs + "Reporting", logs + "Traces"};
   options.others = overflow.size();
+  options.sessionOf = &WorkOwner::current;
   return options;
 }
 
@@ -101,6 +103,7 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
       rtc_(recorder_, clock_, workQueues_, configuration.rtc),
       tattle_(recorder_, clock_, workQueues_),
       gyre_(recorder_, clock_),
+      sessionRecords_(recorder_, clock_, &WorkOwner::enter),
       conditions_(loop_),
       defaults_(stateDirectory + "/defaults", log_),
       notifications_(std::make_shared<FileNotificationCenter>(stateDirectory + "/notifications", loop_, log_)),
@@ -173,7 +176,8 @@ platform::Facilities LinuxPlatform::facilitiesOf() {
                               .traceAnalysis = &traceAnalysis_,
                               .perfDataWriters = &perfDataWriters_,
                               .signposts = &signposts_,
-                              .overflow = &overflow_};
+                              .overflow = &overflow_,
+                              .sessionRecords = standIn(sessionRecords_)};
 }
 
 Status LinuxPlatform::start() {

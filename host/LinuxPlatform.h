@@ -57,6 +57,7 @@
 #include "recorder/RecorderGyreService.h"
 #include "recorder/RecorderPylonService.h"
 #include "recorder/RecorderRtcReportingService.h"
+#include "recorder/RecorderSessionRecords.h"
 #include "recorder/RecorderSnareService.h"
 #include "recorder/RecorderTallyService.h"
 #include "recorder/RecorderTattleService.h"
@@ -154,6 +155,7 @@ class LinuxPlatform final : private platform::ProcessControl {
   recorder::RecorderRtcReportingService rtc_;
   recorder::RecorderTattleService tattle_;
   recorder::RecorderGyreService gyre_;
+  recorder::RecorderSessionRecords sessionRecords_;
   // The facilities that are the machine's own.
   LinuxConditions conditions_;
   JsonDefaultsStore defaults_;

@@ -2,10 +2,11 @@
 
 #include <algorithm>
 #include <cstdio>
+#include <new>
 #include <utility>
 
 #include "plist/formats/Json.h"
-#include "recorder/store/Remedy.h"
+#include "recorder/store/files/Remedy.h"
 
 namespace tarn::recorder {
 
@@ -19,6 +20,8 @@ constexpr double kSecondsADay = 86'400;
 // How long the events and the deletions of one transaction may take; the file's own synchronising comes on top.
 constexpr std::chrono::milliseconds kInsertTime{50};
 constexpr std::chrono::milliseconds kExpireTime{25};
+// What an event takes beside its texts.
+constexpr std::size_t kRowBytes = 32;
 // Between two looks at the clock.
 constexpr std::size_t kEventsBetweenLooks = 64;
 // Something that goes wrong again right after it was put right waits for the next try.
@@ -56,7 +59,8 @@ EventWriter::EventWriter(const RecorderOptions& options, platform::Log& log, con
       log_(log),
       file_(options.file, limitsOf(options), clock, options.boot.empty() ? RecorderTime::currentBoot() : options.boot),
       usage_(options.file, options.folders, capOf(options), options.others),
-      pace_(options.commitWindow, options.fewestWaiting) {
+      pace_(options.commitWindow, options.fewestWaiting),
+      started_(clock.epochSeconds()) {
   file_.setLogLimit(logLimit(options));
 }
 
@@ -80,7 +84,24 @@ Status EventWriter::openOnce() {
   if (missing_) {
     if (auto error = noteMissing(); error.failed()) return error;
   }
-  return carrying_ ? carryOver() : Status();
+  if (carrying_) {
+    if (auto error = carryOver(); error.failed()) return error;
+  }
+  if (file_.hasBegunRun()) return {};
+  return file_.beginRun(
+      {options_.boot.empty() ? RecorderTime::currentBoot() : options_.boot, options_.version, started_});
+}
+
+// A run whose end can't be noted counts as one that was killed.
+void EventWriter::close() noexcept {
+  if (file_.isOpen() && file_.hasBegunRun() && !carrying_) {
+    try {
+      static_cast<void>(file_.endRun(clock_.epochSeconds()));
+    } catch (const std::bad_alloc&) {
+      file_.closeAfterFault();
+    }
+  }
+  file_.close();
 }
 
 void EventWriter::tellWhatOpeningFound() {
@@ -89,6 +110,10 @@ void EventWriter::tellWhatOpeningFound() {
     std::string line = "recorder file " + path;
     line.append(" had something in its log's place that is no regular file; it is set aside as ").append(name);
     log_.error(line);
+  }
+  if (const auto events = file_.takeMigrated()) {
+    log_.notice("recorder file " + path + " had the layout of an older service; its " + std::to_string(*events) +
+                " events have the present one now");
   }
   if (const std::int64_t last = file_.takeGoneUpTo(); last > 0) {
     log_.error("recorder file " + path + " holds nothing of the events up to " + std::to_string(last) +
@@ -172,8 +197,15 @@ std::size_t EventWriter::write(const EventBatch& batch, std::size_t from) {
 
 Result<std::size_t> EventWriter::writeOnce(const EventBatch& batch, std::size_t from) {
   if (auto error = openOnce(); error.failed()) return {0, error};
-  // What the commit before left in doubt began at the same event.
-  if (const std::int64_t in = file_.takeRowsInDoubt(); in > 0) return {static_cast<std::size_t>(in)};
+  // What the commit before left in doubt began at the same event. Notes count no rows; those after the last event that
+  // is in are written again, which changes nothing.
+  if (std::int64_t in = file_.takeRowsInDoubt(); in > 0) {
+    std::size_t next = from;
+    for (; in > 0 && next < batch.size(); ++next) {
+      in -= batch[next].isNote() ? 0 : 1;
+    }
+    return {next - from};
+  }
   const auto begun = clock_.monotonic();
   Status error = file_.begin();
   const SteadyClock::time_point start = SteadyClock::now();
@@ -181,12 +213,7 @@ Result<std::size_t> EventWriter::writeOnce(const EventBatch& batch, std::size_t 
   std::size_t bytes = 0;
   std::size_t next = from;
   for (; error.ok() && next < batch.size() && bytes < most; ++next) {
-    const EventBatch::Event& event = batch[next];
-    const std::string& payload = payloadText(event.payload);
-    detailText_.clear();
-    plist::appendJson(detailText_, event.detail);
-    error = file_.append({event.time, event.backend, batch.name(event), payload, detailText_});
-    bytes += event.nameSize + payload.size() + detailText_.size() + sizeof(double) * 2;
+    error = append(batch, batch[next], bytes);
     if (next % kEventsBetweenLooks == 0 && SteadyClock::now() - start > kInsertTime) {
       bytes = most;
     }
@@ -201,6 +228,19 @@ Result<std::size_t> EventWriter::writeOnce(const EventBatch& batch, std::size_t 
   if (error.failed()) return {0, error};
   pace_.note(next - from, written - begun, clock_.monotonic() - written);
   return {next - from};
+}
+
+Status EventWriter::append(const EventBatch& batch, const EventBatch::Event& event, std::size_t& bytes) {
+  if (event.isNote()) {
+    bytes += event.bytes;
+    return file_.append(batch.note(event));
+  }
+  const bool repeats = lastPayload_.sharesStorageWith(event.payload);
+  const std::string& payload = payloadText(event.payload);
+  detailText_.clear();
+  plist::appendJson(detailText_, event.detail);
+  bytes += kRowBytes + (repeats ? 0 : event.nameSize + payload.size() + detailText_.size());
+  return file_.append({event.time, event.backend, batch.name(event), payload, detailText_}, repeats, event.session);
 }
 
 // The two events of a message carry one payload, which becomes text once.

@@ -45,9 +45,10 @@ class EventWriter {
   // Opens the file if it isn't open, and carries on what a failure left half done: a loss to be noted, rows to be
   // carried out of a file that was set aside. False: a fault; come again later. The first time it reads the whole file.
   [[nodiscard]] bool open();
-  // Writes events from `from` on in one transaction: all of them, or as many as fit into the time (50 ms) and size (a
-  // sixteenth of the cap, 64 KiB to 8 MiB) of a commit. Also removes what retention doesn't keep. How many are now
-  // committed and synchronised; 0 for a fault, after which the same events come again. An event is never written twice.
+  // Writes events and notes from `from` on in one transaction: all of them, or as many as fit into the time (50 ms) and
+  // size (a sixteenth of the cap, 64 KiB to 8 MiB) of a commit. Also removes what retention doesn't keep. How many are
+  // now committed and synchronised; 0 for a fault, after which the same events come again. An event is never written
+  // twice.
   [[nodiscard]] std::size_t write(const EventBatch& batch, std::size_t from);
   // What may wait until the commit is announced: the checkpoint, and the word that a fault is over. False: a fault.
   [[nodiscard]] bool settle();
@@ -64,8 +65,8 @@ class EventWriter {
   void expect(std::int64_t lastId) noexcept { file_.expect(lastId); }
   // Of the last committed event, in this file or in those before it; 0 for none.
   std::int64_t lastId() const noexcept { return file_.lastId(); }
-  // Brings the log in and lets go of the file.
-  void close() noexcept { file_.close(); }
+  // Notes that the run ended well, brings the log in and lets go of the file.
+  void close() noexcept;
   // After something else than the file failed in the middle of any of these: the next one opens the file again and
   // finds out what is in it.
   void closeAfterFault() noexcept { file_.closeAfterFault(); }
@@ -92,6 +93,8 @@ class EventWriter {
   // Error lines for what the file lost while nobody looked.
   void tellWhatOpeningFound();
   [[nodiscard]] Status noteMissing();
+  // One event, or one note; the bytes that it takes are added.
+  [[nodiscard]] Status append(const EventBatch& batch, const EventBatch::Event& event, std::size_t& bytes);
   // Goes on with the rows of a file that was set aside, until they are all in this one.
   [[nodiscard]] Status carryOver();
   // Removes what is over its share beside the database, and lets the database have what is left of the cap.
@@ -120,6 +123,7 @@ class EventWriter {
   std::chrono::nanoseconds faultSince_{0};
   std::unique_ptr<CarryOver> carrying_;  // out of a file that was set aside, while that isn't over
   std::optional<IdRange> missing_;       // to be noted
+  const double started_;                 // epoch seconds
   std::string problem_;                  // of the last failure
   bool lacksMemory_ = false;
   bool longLogTold_ = false;

@@ -64,6 +64,7 @@ void Recorder::shutdown() {
 void Recorder::record(std::string_view backend, std::string_view name, plist::Dictionary payload,
                       plist::Dictionary detail, double time) {
   const TarnReportingSignpost signpost(SignpostCategory::BackEnd, "recorder", backend);
+  const platform::SessionNumber session = options_.sessionOf == nullptr ? 0 : options_.sessionOf();
   bool wake = false;
   bool refused = false;
   {
@@ -76,22 +77,14 @@ void Recorder::record(std::string_view backend, std::string_view name, plist::Di
     } else {
       const std::size_t before = incoming_.bytes();
       try {
-        waitingBytes_ += incoming_.add(backend, name, std::move(payload), std::move(detail), time);
+        waitingBytes_ += incoming_.add(backend, name, std::move(payload), std::move(detail), time, session);
       } catch (const std::bad_alloc&) {
         ++failed_;
         ++withoutMemory_;
         keepCounts();
         throw;
       }
-      if (incoming_.size() == 1) {
-        incomingSince_ = SteadyClock::now();
-        if (oldestSince_.load(std::memory_order_relaxed) == 0) {
-          oldestSince_.store(incomingSince_.time_since_epoch().count(), std::memory_order_relaxed);
-        }
-      }
-      // While a group is gathered the writer looks by itself; it is called only to begin one, or for a large one.
-      wake = std::exchange(asleep_, false) || incoming_.size() == options_.groupEvents ||
-             (before < options_.groupBytes && incoming_.bytes() >= options_.groupBytes);
+      wake = noteIncoming(before);
       noteUse();
     }
   }
@@ -101,6 +94,34 @@ void Recorder::record(std::string_view backend, std::string_view name, plist::Di
   if (refused) {
     log_.error("recorder is not running; the events handed over now are lost");
   }
+}
+
+void Recorder::note(SessionNote note) {
+  bool wake = false;
+  {
+    const MutexLock lock(mutex_);
+    if (refusing_) return;
+    const std::size_t before = incoming_.bytes();
+    waitingBytes_ += incoming_.add(std::move(note));
+    ++notes_;
+    wake = noteIncoming(before);
+    noteUse();
+  }
+  if (wake) {
+    work_.notifyOne();
+  }
+}
+
+bool Recorder::noteIncoming(std::size_t bytesBefore) {
+  if (incoming_.size() == 1) {
+    incomingSince_ = SteadyClock::now();
+    if (oldestSince_.load(std::memory_order_relaxed) == 0) {
+      oldestSince_.store(incomingSince_.time_since_epoch().count(), std::memory_order_relaxed);
+    }
+  }
+  // While a group is gathered the writer looks by itself; it is called only to begin one, or for a large one.
+  return std::exchange(asleep_, false) || incoming_.size() == options_.groupEvents ||
+         (bytesBefore < options_.groupBytes && incoming_.bytes() >= options_.groupBytes);
 }
 
 void Recorder::noteUse() noexcept {
@@ -140,16 +161,18 @@ bool Recorder::isFull() noexcept {
 bool Recorder::flush(std::chrono::milliseconds timeout) {
   const MutexLock lock(mutex_);
   const std::uint64_t target = accepted();
+  const std::uint64_t notes = notes_;
   awaited_ = target;
+  awaitedNotes_ = notes;
   work_.notifyOne();
   // Events are committed in their order, so the count alone tells.
-  const bool done =
-      done_.waitFor(mutex_, timeout, [&]() TARN_REQUIRES(mutex_) { return committed_ >= target || hasGivenUp(); });
+  const bool done = done_.waitFor(mutex_, timeout,
+                                  [&]() TARN_REQUIRES(mutex_) { return isCommitted(target, notes) || hasGivenUp(); });
   return done && !hasGivenUp();
 }
 
 Recorder::Settlement Recorder::settlement(std::shared_ptr<platform::WorkQueue> queue, platform::Work done) {
-  return {std::make_shared<Settling>(Settling{0, std::move(queue), std::move(done)})};
+  return {std::make_shared<Settling>(Settling{0, 0, std::move(queue), std::move(done)})};
 }
 
 void Recorder::settle(Settlement settlement) noexcept {
@@ -158,8 +181,10 @@ void Recorder::settle(Settlement settlement) noexcept {
     const MutexLock lock(mutex_);
     if (hasGivenUp()) return;  // nothing will be whole again
     settling->target = accepted();
-    if (committed_ != settling->target) {
+    settling->notes = notes_;
+    if (!isCommitted(settling->target, settling->notes)) {
       awaited_ = settling->target;
+      awaitedNotes_ = settling->notes;
       settling_.splice(settling_.end(), settlement);
       work_.notifyOne();
       return;

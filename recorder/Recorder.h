@@ -38,7 +38,7 @@
 #include "recorder/EventWriter.h"
 #include "recorder/RecorderOptions.h"
 #include "recorder/store/EventBatch.h"
-#include "recorder/store/HandOverPage.h"
+#include "recorder/store/files/HandOverPage.h"
 
 namespace tarn::recorder {
 
@@ -84,6 +84,9 @@ class Recorder {
   // any.
   void record(std::string_view backend, std::string_view name, plist::Dictionary payload, plist::Dictionary detail,
               double time);
+  // What happened to a session, in order with the events and as safe as they are. After shutdown() it isn't kept.
+  // Throws where there is no memory for it, and then it isn't kept. Threads: any.
+  void note(SessionNote note);
   // Whether events should not be brought in for now: too many wait, or the oldest for too long. A load or two, with a
   // look at the clock while events wait; asked for each request. It stays true until the low marks are reached and the
   // room handler is called. Threads: any.
@@ -148,7 +151,9 @@ class Recorder {
   void notePace() TARN_REQUIRES(mutex_);
   bool hasRoom() const TARN_REQUIRES(mutex_);
   // So many are committed: the counts, those who wait, and the room handler where there is room again.
-  void account(std::size_t events, std::size_t bytes) TARN_REQUIRES(mutex_);
+  void account(std::size_t events, std::size_t notes, std::size_t bytes) TARN_REQUIRES(mutex_);
+  // One more waits, an event or a note; whether the writer is to be called.
+  [[nodiscard]] bool noteIncoming(std::size_t bytesBefore) TARN_REQUIRES(mutex_);
   // False where memory is missing for an answer: it is still owed.
   bool answerSettled() TARN_REQUIRES(mutex_);
   static bool answer(const std::shared_ptr<Settling>& settled) noexcept;
@@ -156,10 +161,15 @@ class Recorder {
   // Of what was handed over, that which is to be committed.
   std::uint64_t accepted() const noexcept TARN_REQUIRES(mutex_) { return handedOver_ - failed_; }
   // Whether any was given up that had been taken.
-  bool hasGivenUp() const noexcept TARN_REQUIRES(mutex_) { return failed_ != withoutMemory_; }
-  bool hasWaiting() const noexcept TARN_REQUIRES(mutex_) { return committed_ + failed_ != handedOver_; }
+  bool hasGivenUp() const noexcept TARN_REQUIRES(mutex_) { return failed_ != withoutMemory_ || notesLost_; }
+  bool hasWaiting() const noexcept TARN_REQUIRES(mutex_) {
+    return committed_ + failed_ != handedOver_ || notesDone_ != notes_;
+  }
+  bool isCommitted(std::uint64_t events, std::uint64_t notes) const noexcept TARN_REQUIRES(mutex_) {
+    return committed_ >= events && notesDone_ >= notes;
+  }
   // Whether somebody waits for a commit: then it isn't put off for company.
-  bool isAwaited() const noexcept TARN_REQUIRES(mutex_) { return committed_ < awaited_; }
+  bool isAwaited() const noexcept TARN_REQUIRES(mutex_) { return !isCommitted(awaited_, awaitedNotes_); }
 
   const RecorderOptions options_;
   const std::filesystem::path countsFile_;
@@ -200,6 +210,11 @@ class Recorder {
   std::uint64_t withoutMemory_ TARN_GUARDED_BY(mutex_) = 0;  // of these
   std::uint64_t expired_ TARN_GUARDED_BY(mutex_) = 0;
   std::uint64_t lostBefore_ TARN_GUARDED_BY(mutex_) = 0;
+  // Notes, which the counters don't count.
+  std::uint64_t notes_ TARN_GUARDED_BY(mutex_) = 0;
+  std::uint64_t notesDone_ TARN_GUARDED_BY(mutex_) = 0;
+  std::uint64_t awaitedNotes_ TARN_GUARDED_BY(mutex_) = 0;
+  bool notesLost_ TARN_GUARDED_BY(mutex_) = false;  // at a shutdown
   HandOverPage counts_ TARN_GUARDED_BY(mutex_);
   HandOverCounts before_ TARN_GUARDED_BY(mutex_);    // counted along until the loss of the run before is told
   std::int64_t lastId_ TARN_GUARDED_BY(mutex_) = 0;  // of the last committed event
@@ -218,7 +233,8 @@ class Recorder {
 // One that waits for a commit. Shared with the work that answers it, so that it is still there when no memory was for
 // that work.
 struct Recorder::Settling {
-  std::uint64_t target;  // committed when so many are
+  std::uint64_t target;  // committed when so many events are,
+  std::uint64_t notes;   // and so many notes
   std::shared_ptr<platform::WorkQueue> queue;
   platform::Work done;
 };

@@ -66,6 +66,10 @@ struct RecorderOptions {
 
   // What tells this boot of the system from others; the kernel's own name for it when empty.
   std::string boot;
+  // Of the service, for the row of its run.
+  std::string version;
+  // For which session the calling thread works, 0 for none; asked with every event. Null: for none.
+  std::int64_t (*sessionOf)() noexcept = nullptr;
 
   // After a fault the next try comes after the first pause, each further one after twice as long, up to the last: a
   // disk that comes back is found within a second, and one that doesn't costs next to nothing.

@@ -154,25 +154,27 @@ bool Recorder::writeCurrent() {
     full_.store(true, std::memory_order_relaxed);
   }
   mutex_.unlock();
-  std::size_t events = 0;
+  std::size_t written = 0;
   tryTo([&] {
-    events = writer_.write(current_, position_);
-    return events > 0;
+    written = writer_.write(current_, position_);
+    return written > 0;
   });
   std::size_t bytes = 0;
-  for (std::size_t i = 0; i < events; ++i) {
+  std::size_t notes = 0;
+  for (std::size_t i = 0; i < written; ++i) {
     bytes += current_[position_ + i].bytes;
+    notes += current_[position_ + i].isNote() ? 1U : 0U;
   }
-  position_ += events;
+  position_ += written;
   const bool finished = position_ == current_.size();
   mutex_.lock();
-  account(events, bytes);
+  account(written - notes, notes, bytes);
   mutex_.unlock();
   if (finished) {
     current_.clear();
     position_ = 0;
   }
-  const bool healthy = events > 0 && tryTo([this] { return writer_.settle(); });
+  const bool healthy = written > 0 && tryTo([this] { return writer_.settle(); });
   if (writer_.hasMoreToBringIn()) {
     nextMaintenance_ = std::min(nextMaintenance_, SteadyClock::now() + options_.lastRetry);
   }
@@ -227,11 +229,12 @@ bool Recorder::maintain() {
 }
 
 // Called locked, and returns so; the room handler runs without the lock.
-void Recorder::account(std::size_t events, std::size_t bytes) {
+void Recorder::account(std::size_t events, std::size_t notes, std::size_t bytes) {
   committed_ += events;
+  notesDone_ += notes;
   waitingBytes_ -= bytes;
   expired_ = writer_.expired();
-  if (events > 0) {
+  if (events + notes > 0) {
     lastId_ = writer_.lastId();
     noteOldest();
     notePace();
@@ -262,7 +265,7 @@ void Recorder::account(std::size_t events, std::size_t bytes) {
 // Called locked, and returns so; queues are called without the lock. False when memory is missing for an answer: it is
 // still owed.
 bool Recorder::answerSettled() {
-  while (!settling_.empty() && settling_.front()->target <= committed_) {
+  while (!settling_.empty() && isCommitted(settling_.front()->target, settling_.front()->notes)) {
     const std::shared_ptr<Settling> settled = settling_.front();
     mutex_.unlock();
     const bool answered = answer(settled);
@@ -278,6 +281,7 @@ void Recorder::giveUp() {
   unanswered.swap(settling_);
   const std::uint64_t lost = handedOver_ - committed_ - failed_;
   failed_ += lost;
+  notesLost_ = notesDone_ != notes_;
   keepCounts();
   waitingBytes_ = 0;
   incoming_.clear();

@@ -12,6 +12,21 @@ constexpr std::size_t kPayloads = 4096;
 
 }  // namespace
 
+double bytesAMessageOf(const std::string& file) {
+  sqlite3* database = nullptr;
+  sqlite3_stmt* size = nullptr;
+  sqlite3_open_v2(file.c_str(), &database, SQLITE_OPEN_READONLY, nullptr);
+  constexpr const char* kSize =
+      "SELECT 2.0 * page_count * page_size / (SELECT max(id) FROM events) FROM pragma_page_count, pragma_page_size";
+  if (sqlite3_prepare_v2(database, kSize, -1, &size, nullptr) != SQLITE_OK || sqlite3_step(size) != SQLITE_ROW) {
+    fail("can't read " + file + ": " + sqlite3_errmsg(database));
+  }
+  const double bytes = sqlite3_column_double(size, 0);
+  sqlite3_finalize(size);
+  sqlite3_close(database);
+  return bytes;
+}
+
 SqliteAlone::SqliteAlone(const std::string& directory) : directory_(directory) {
   if (sqlite3_open((directory_.path() + "/alone.sqlite3").c_str(), &database_) != SQLITE_OK) {
     fail("can't make a database in " + directory);
@@ -44,6 +59,10 @@ void SqliteAlone::insert(const char* name, const std::string& payload) {
     fail(std::string("SQLite: ") + sqlite3_errmsg(database_));
   }
   sqlite3_reset(insert_);
+}
+
+double SqliteAlone::bytesAMessage() {
+  return bytesAMessageOf(directory_.path() + "/alone.sqlite3");
 }
 
 void SqliteAlone::write(std::size_t messages) {

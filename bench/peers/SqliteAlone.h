@@ -11,6 +11,10 @@
 
 namespace tarn::bench {
 
+// What a database takes for a message, whose table or view `events` has two events of each; its log is counted as if it
+// were brought in.
+double bytesAMessageOf(const std::string& file);
+
 class SqliteAlone {
  public:
   // Makes its file in the directory.
@@ -21,6 +25,8 @@ class SqliteAlone {
 
   // Writes two rows for each of so many messages.
   void write(std::size_t messages);
+  // What its file takes for a message, of those written so far.
+  double bytesAMessage();
 
  private:
   void run(const char* text);

@@ -5,6 +5,8 @@
 #include <algorithm>
 #include <system_error>
 
+#include "recorder/store/StoreLayout.h"
+
 namespace tarn::recorder {
 
 namespace {
@@ -53,13 +55,13 @@ void CarryOver::open(const EventFile& into) {
   // A file that was cut is read as far as it goes.
   sqlite3_db_config(connection_.handle(), SQLITE_DBCONFIG_WRITABLE_SCHEMA, 1, nullptr);
   sqlite3_progress_handler(connection_.handle(), kStepsAtOnce, spendSteps, &stepsLeft_);
+  const EventSelect events = selectEvents(connection_);
   const std::string columns =
       connection_.text("SELECT group_concat(name) FROM (SELECT * FROM pragma_table_info('events') ORDER BY cid)")
           .value_or("");
-  const bool isOurs = columns.starts_with("id,time,backend,name,payload,detail");
-  ended_ = !isOurs || rows_.prepare(connection_.handle(),
-                                    "SELECT id, time, backend, name, payload, detail FROM events WHERE id > ?1 "
-                                    "ORDER BY id LIMIT 1024") != SQLITE_OK;
+  const bool isOurs = !events.isOlder || columns.starts_with("id,time,backend,name,payload,detail");
+  const std::string select = std::string(events.sql) + " WHERE r.id > ?1 ORDER BY r.id LIMIT 1024";
+  ended_ = !isOurs || rows_.prepare(connection_.handle(), select) != SQLITE_OK;
   static_cast<void>(groups_.prepare(connection_.handle(),
                                     "SELECT first, seconds, hashes FROM event_groups WHERE first <= ?1 "
                                     "ORDER BY first DESC LIMIT 1"));
@@ -70,7 +72,9 @@ void CarryOver::open(const EventFile& into) {
 
 // An id that lies far beyond all others isn't one.
 std::int64_t CarryOver::lastToLookFor(std::int64_t known) {
-  const std::int64_t held = connection_.integer("SELECT max(id) FROM events WHERE id < 1 << 62").value_or(0);
+  const char* const greatest = selectEvents(connection_).isOlder ? "SELECT max(id) FROM events WHERE id < 1 << 62"
+                                                                 : "SELECT max(id) FROM event_rows WHERE id < 1 << 62";
+  const std::int64_t held = connection_.integer(greatest).value_or(0);
   return known > 0 && held - known > kMostIds ? known : std::max(known, held);
 }
 
@@ -110,19 +114,23 @@ void CarryOver::readRow(double now) {
     groups_.reset();
   }
   if (!rows_.isReal(1) || !rows_.isText(2) || !rows_.isText(3) || !rows_.isText(4) || !rows_.isText(5)) return;
-  const StoredEvent event{rows_.real(1), rows_.text(2), rows_.text(3), rows_.text(4), rows_.text(5)};
+  const StoredEvent event{rows_.real(1), rows_.text(2), rows_.text(3), rows_.text(4), rows_.text(5), rows_.integer(6)};
   const bool proven = group_.holds(id);
   if (proven && hashOf(id, event) != group_.hash(id)) return;
   some_.push_back({id, proven ? group_.seconds() : now, event.time, std::string(event.backend), std::string(event.name),
-                   std::string(event.payload), std::string(event.detail)});
+                   std::string(event.payload), std::string(event.detail), event.session});
 }
 
 Status CarryOver::writeSome(EventFile& into) {
   if (some_.empty()) return {};
   if (auto error = into.begin(); error.failed()) return error;
+  const Read* before = nullptr;
   for (const Read& row : some_) {
-    auto error = into.carry(row.id, row.seconds, {row.time, row.backend, row.name, row.payload, row.detail});
+    const bool repeats = before != nullptr && before->payload == row.payload;
+    auto error = into.carry(row.id, row.seconds,
+                            {row.time, row.backend, row.name, row.payload, row.detail, row.session}, repeats);
     if (error.failed()) return error;
+    before = &row;
   }
   if (auto error = into.commit(); error.failed()) return error;
   for (const Read& row : some_) {
@@ -142,24 +150,28 @@ Status CarryOver::writeSome(EventFile& into) {
 Status CarryOver::finish(EventFile& into) {
   rows_.finalize();
   groups_.finalize();
-  connection_.close();
   if (wanted_ > 0 && wanted_ <= last_) {
     addRange(lost_, {wanted_, last_});
   }
   wanted_ = 0;
   into.skipTo(last_);
-  if (first_ == 0 && lost_.empty()) return {};
   if (auto error = into.begin(); error.failed()) return error;
-  Status error;
+  Status error = into.carrySessions(connection_);
   for (std::size_t i = 0; error.ok() && i < lost_.size(); ++i) {
     error = into.noteLoss(lost_[i]);
   }
   const std::int64_t begins =
       lost_.empty() ? first_ : std::min(first_ == 0 ? lost_.front().first : first_, lost_.front().first);
-  if (error.ok()) {
+  if (error.ok() && begins != 0) {
     error = into.noteCarried(begins);
   }
-  return error.failed() ? error : into.commit();
+  if (error.ok()) {
+    error = into.commit();
+  }
+  if (error.ok()) {
+    connection_.close();
+  }
+  return error;
 }
 
 }  // namespace tarn::recorder

@@ -54,6 +54,7 @@ class CarryOver {
     std::string name;
     std::string payload;
     std::string detail;
+    std::int64_t session;
   };
 
   // Opens the old file read-only, trusting nothing of its schema; one that can't be opened or isn't a recorder's has no

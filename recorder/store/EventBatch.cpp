@@ -16,7 +16,7 @@ void EventBatch::reserve(std::size_t events) {
 }
 
 std::size_t EventBatch::add(std::string_view backend, std::string_view name, plist::Dictionary payload,
-                            plist::Dictionary detail, double time) {
+                            plist::Dictionary detail, double time, platform::SessionNumber session) {
   std::size_t bytes = sizeof(Event) + name.size();
   if (events_.empty() || !events_.back().payload.sharesStorageWith(payload)) {
     bytes += payload.storageBytes();
@@ -27,7 +27,7 @@ std::size_t EventBatch::add(std::string_view backend, std::string_view name, pli
   const std::size_t nameAt = names_.size();
   names_.append(name);
   try {
-    events_.push_back(Event{backend, time, nameAt, name.size(), bytes, std::move(payload), std::move(detail)});
+    events_.push_back(Event{backend, time, nameAt, name.size(), bytes, std::move(payload), std::move(detail), session});
   } catch (...) {
     names_.resize(nameAt);
     throw;
@@ -36,8 +36,23 @@ std::size_t EventBatch::add(std::string_view backend, std::string_view name, pli
   return bytes;
 }
 
+std::size_t EventBatch::add(SessionNote note) {
+  const std::size_t bytes = sizeof(Event) + sizeof(SessionNote) + note.facts.process.size() +
+                            note.facts.application.size() + note.facts.serviceName.size();
+  notes_.push_back(std::move(note));
+  try {
+    events_.push_back(Event{{}, 0, 0, 0, bytes, {}, {}, 0, notes_.size() - 1});
+  } catch (...) {
+    notes_.pop_back();
+    throw;
+  }
+  bytes_ += bytes;
+  return bytes;
+}
+
 void EventBatch::clear() noexcept {
   events_.clear();
+  notes_.clear();
   names_.clear();
   bytes_ = 0;
 }
@@ -45,6 +60,7 @@ void EventBatch::clear() noexcept {
 void EventBatch::swap(EventBatch& other) noexcept {
   events_.swap(other.events_);
   names_.swap(other.names_);
+  notes_.swap(other.notes_);
   std::swap(bytes_, other.bytes_);
 }
 

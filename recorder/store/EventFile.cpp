@@ -7,9 +7,10 @@
 #include <string>
 #include <utility>
 
-#include "recorder/store/Remedy.h"
 #include "recorder/store/StoreLayout.h"
+#include "recorder/store/StoreMigration.h"
 #include "recorder/store/files/MappedGuard.h"
+#include "recorder/store/files/Remedy.h"
 
 namespace tarn::recorder {
 
@@ -27,20 +28,10 @@ EventFile::EventFile(std::filesystem::path path, const RetentionLimits& limits, 
 
 Status EventFile::open() {
   Status error = files_.prepare();
-  if (error.ok()) {
-    error = openConnection();
-  }
-  if (error.ok()) {
-    error = checkContent();
-  }
-  if (error.ok()) {
-    error = settleDoubt();
-  }
-  if (error.ok()) {
-    error = time_.open(connection_);
-  }
-  if (error.ok()) {
-    error = prepareStatements();
+  for (const auto step : {&EventFile::openConnection, &EventFile::checkContent, &EventFile::settleDoubt,
+                          &EventFile::openTime, &EventFile::prepareStatements}) {
+    if (error.failed()) break;
+    error = (this->*step)();
   }
   if (error.failed()) {
     closeAfterFault();
@@ -83,15 +74,30 @@ Status EventFile::checkContent() {
   if (!files_.isKnownGood()) {
     if (auto error = checkPages(connection_); error.failed()) return error;
   }
-  bool made = false;
-  Status error = checkTables(connection_, lastId_, made);
-  if (error.ok() && made && expected_ > 0) {
+  Tables found = Tables::Current;
+  Status error = checkTables(connection_, lastId_, found);
+  if (error.ok() && found == Tables::Older) {
+    error = migrateOlder();
+  }
+  if (error.ok() && found == Tables::Made && expected_ > 0) {
     goneUpTo_ = expected_;
   }
   if (error.ok()) {
     expected_ = 0;
   }
   return error;
+}
+
+Status EventFile::migrateOlder() {
+  if (const auto last = readLastId(connection_); last.failed()) return last.error;
+  const Result<std::int64_t> events = migrate(connection_);
+  if (events.failed()) return events.error;
+  migrated_ = events.value;
+  // Its log is as large as all of it. A reader in the way is no fault.
+  const int code =
+      sqlite3_wal_checkpoint_v2(connection_.handle(), nullptr, SQLITE_CHECKPOINT_TRUNCATE, nullptr, nullptr);
+  logPages_ = code == SQLITE_OK ? 0 : logPages_;
+  return {};
 }
 
 // Rows that are in were written once, but their synchronisation failed: only in the database, and synchronised with it,
@@ -118,41 +124,30 @@ std::int64_t EventFile::takeRowsInDoubt() noexcept {
 }
 
 Status EventFile::prepareStatements() {
-  sqlite3* const database = connection_.handle();
-  int code = begin_.prepare(database, "BEGIN IMMEDIATE", true);
-  const auto prepareInsert = [&](Statement& statement, const char* verb) {
-    const std::string sql =
-        std::string(verb) + " INTO events(id, time, backend, name, payload, detail) VALUES(?1, ?2, ?3, ?4, ?5, ?6)";
-    return statement.prepare(database, sql, true);
-  };
-  if (code == SQLITE_OK) {
-    code = prepareInsert(insert_, "INSERT");
+  const struct {
+    Statement& statement;
+    const char* sql;
+  } all[] = {{begin_, "BEGIN IMMEDIATE"},
+             {keepLastId_, "INSERT OR REPLACE INTO recorder_state VALUES('last_id', ?1)"},
+             {commit_, "COMMIT"},
+             {insertGroup_, "INSERT OR REPLACE INTO event_groups VALUES(?1, ?2, ?3)"}};
+  for (const auto& [statement, sql] : all) {
+    const int code = statement.prepare(connection_.handle(), sql, true);
+    if (code != SQLITE_OK) return connection_.errorOf(code);
   }
-  if (code == SQLITE_OK) {
-    code = prepareInsert(carry_, "INSERT OR REPLACE");
-  }
-  if (code == SQLITE_OK) {
-    code = keepLastId_.prepare(database, "INSERT OR REPLACE INTO recorder_state VALUES('last_id', ?1)", true);
-  }
-  if (code == SQLITE_OK) {
-    code = commit_.prepare(database, "COMMIT", true);
-  }
-  if (code == SQLITE_OK) {
-    code = insertGroup_.prepare(database, "INSERT OR REPLACE INTO event_groups VALUES(?1, ?2, ?3)", true);
-  }
-  if (code == SQLITE_OK) {
-    code = retention_.prepare(connection_);
-  }
+  runBegun_ = false;
+  int code = table_.prepare(connection_);
+  code = code == SQLITE_OK ? sessions_.prepare(connection_) : code;
+  code = code == SQLITE_OK ? retention_.prepare(connection_) : code;
   return connection_.errorOf(code);
 }
 
 void EventFile::finalizeStatements() noexcept {
-  begin_.finalize();
-  insert_.finalize();
-  carry_.finalize();
-  keepLastId_.finalize();
-  commit_.finalize();
-  insertGroup_.finalize();
+  for (Statement* const statement : {&begin_, &keepLastId_, &commit_, &insertGroup_}) {
+    statement->finalize();
+  }
+  table_.finalize();
+  sessions_.finalize();
   check_.finalize();
   retention_.finalize();
 }
@@ -225,46 +220,69 @@ Status EventFile::checkLog() {
   return {};
 }
 
-Status EventFile::append(const StoredEvent& event) {
-  Status error = insertAs(nextId_, event, insert_);
+Status EventFile::rollbackAfter(int code) {
+  Status error = connection_.errorOf(code);
+  if (error.failed()) {
+    rollback();
+  }
+  return error;
+}
+
+void EventFile::rollback() {
+  connection_.rollback();
+  table_.forget();
+  sessions_.rolledBack();
+}
+
+Status EventFile::beginRun(const RunFacts& run) {
+  Status error = begin();
+  error = error.ok() ? rollbackAfter(sessions_.beginRun(run)) : error;
+  error = error.ok() ? commit() : error;
+  runBegun_ = error.ok();
+  return error;
+}
+
+Status EventFile::endRun(double time) {
+  Status error = begin();
+  error = error.ok() ? rollbackAfter(sessions_.endRun(time)) : error;
+  return error.ok() ? commit() : error;
+}
+
+Status EventFile::append(const SessionNote& note) {
+  return rollbackAfter(sessions_.write(note, time_.seconds()));
+}
+
+Status EventFile::append(const StoredEvent& event, bool repeatsPayload, platform::SessionNumber owner) {
+  StoredEvent owned = event;
+  owned.session = sessions_.rowOf(owner);
+  Status error = rollbackAfter(sessions_.noteEvent(owner, nextId_));
+  if (error.failed()) return error;
+  error = insertAs(nextId_, owned, repeatsPayload, false);
   if (error.ok()) {
     ++nextId_;
   }
   return error;
 }
 
-Status EventFile::carry(std::int64_t id, double seconds, const StoredEvent& event) {
+Status EventFile::carry(std::int64_t id, double seconds, const StoredEvent& event, bool repeatsPayload) {
   if (id != group_.end() || seconds != group_.seconds()) {
-    if (auto error = connection_.errorOf(writeGroup()); error.failed()) {
-      connection_.rollback();
-      return error;
-    }
+    if (auto error = rollbackAfter(writeGroup()); error.failed()) return error;
     group_.begin(id, seconds);
   }
   skipTo(id);
   nextId_ = lastId_ + 1;
-  return insertAs(id, event, carry_);
+  return insertAs(id, event, repeatsPayload, true);
 }
 
-Status EventFile::insertAs(std::int64_t id, const StoredEvent& event, Statement& statement) {
-  int code = statement.bind(1, id)
-                 .bind(2, std::isnan(event.time) ? 0.0 : event.time)
-                 .bind(3, event.backend)
-                 .bind(4, event.name)
-                 .bind(5, event.payload)
-                 .bind(6, event.detail)
-                 .run();
+Status EventFile::insertAs(std::int64_t id, const StoredEvent& event, bool repeatsPayload, bool replacing) {
+  int code = table_.insert(id, event, repeatsPayload, replacing);
   if (code == SQLITE_OK) {
     group_.add(hashOf(id, event));
     if (group_.size() == EventGroup::kMostEvents) {
       code = writeGroup();
     }
   }
-  Status error = connection_.errorOf(code);
-  if (error.failed()) {
-    connection_.rollback();
-  }
-  return error;
+  return rollbackAfter(code);
 }
 
 // Writes the group of what was appended, and begins another one after it.
@@ -274,6 +292,10 @@ int EventFile::writeGroup() {
   const int code = insertGroup_.bind(1, group_.first()).bind(2, group_.seconds()).bindBytes(3, groupHashes_).run();
   group_.begin(group_.end(), group_.seconds());
   return code;
+}
+
+Status EventFile::carrySessions(Connection& from) {
+  return rollbackAfter(SessionTable::carry(from, connection_));
 }
 
 Status EventFile::noteLoss(const IdRange& lost) {
@@ -286,11 +308,7 @@ Status EventFile::noteLoss(const IdRange& lost) {
   if (code == SQLITE_OK) {
     code = keepLastId_.bind(1, lastId_).run();
   }
-  Status error = connection_.errorOf(code);
-  if (error.failed()) {
-    connection_.rollback();
-  }
-  return error;
+  return rollbackAfter(code);
 }
 
 Status EventFile::noteCarried(std::int64_t first) {
@@ -301,26 +319,19 @@ Status EventFile::noteCarried(std::int64_t first) {
   if (code == SQLITE_OK) {
     code = note.bind(1, first).bind(2, lastId_).run();
   }
-  Status error = connection_.errorOf(code);
-  if (error.failed()) {
-    connection_.rollback();
-  }
-  return error;
+  return rollbackAfter(code);
 }
 
 Status EventFile::expire(std::chrono::steady_clock::time_point deadline) {
   int code = writeGroup();
-  if (code == SQLITE_OK) {
-    code = retention_.expire(time_.seconds(), nextId_ - 1, deadline, expiring_);
-  }
+  code = code == SQLITE_OK ? retention_.expire(time_.seconds(), nextId_ - 1, deadline, expiring_) : code;
   if (code == SQLITE_OK && expiring_ > 0) {
     code = keepLastId_.bind(1, nextId_ - 1).run();
   }
-  Status error = connection_.errorOf(code);
-  if (error.failed()) {
-    connection_.rollback();
+  if (code == SQLITE_OK && (expiring_ > 0 || nextId_ == lastId_ + 1)) {
+    code = sessions_.expire(time_.seconds(), retention_.maxAgeSeconds(), retention_.mostSessions());
   }
-  return error;
+  return rollbackAfter(code);
 }
 
 Status EventFile::commit() {
@@ -335,13 +346,14 @@ Status EventFile::commit() {
   if (auto error = connection_.errorOf(code); error.failed()) {
     // What could not be written as a whole is not in; readers need somebody who keeps the file open.
     if (remedyFor(code) == Remedy::Wait) {
-      connection_.rollback();
+      rollback();
       return error;
     }
     inDoubt_ = std::max(inDoubt_, nextId_ - 1 - lastId_);
     closeAfterFault();
     return error;
   }
+  sessions_.committed();
   lastId_ = nextId_ - 1;
   logBytes_ = logPages_ * (pageBytes_ + kFrameHeaderBytes);
   expired_ += std::exchange(expiring_, 0);
@@ -349,13 +361,8 @@ Status EventFile::commit() {
 }
 
 Status EventFile::verify(std::chrono::steady_clock::time_point deadline) {
-  Status error;
-  if (check_.isDone()) {
-    error = check_.begin();
-  }
-  if (error.ok()) {
-    error = check_.goOn(deadline);
-  }
+  Status error = check_.isDone() ? check_.begin() : Status();
+  error = error.ok() ? check_.goOn(deadline) : error;
   if (error.ok() && !check_.lost().empty()) {
     error = Error{SQLITE_CORRUPT, "damaged: events " + textOf(check_.lost()) + " aren't as they were written"};
   }

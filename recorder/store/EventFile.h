@@ -27,8 +27,10 @@
 #include "recorder/store/Checkpointer.h"
 #include "recorder/store/Connection.h"
 #include "recorder/store/EventGroup.h"
+#include "recorder/store/EventTable.h"
 #include "recorder/store/RecorderTime.h"
 #include "recorder/store/Retention.h"
+#include "recorder/store/SessionTable.h"
 #include "recorder/store/Statement.h"
 #include "recorder/store/StoreCheck.h"
 #include "recorder/store/files/StoreFiles.h"
@@ -65,17 +67,28 @@ class EventFile {
   // Begins a transaction, once the file at the path and its log are found to be those that were opened. Nobody else can
   // write until it is over; a lock of another's is waited for 50 ms.
   [[nodiscard]] Status begin();
+  // Notes that this run began, and closes what earlier ones left open; in a transaction of its own, before the first
+  // event or note of each opening and after what is carried into the file.
+  [[nodiscard]] Status beginRun(const RunFacts& run);
+  bool hasBegunRun() const noexcept { return runBegun_; }
+  // Notes that it ended well, in a transaction of its own.
+  [[nodiscard]] Status endRun(double time);
+  // What happened to a session, after the events appended so far; in a transaction.
+  [[nodiscard]] Status append(const SessionNote& note);
   // Adds an event under the next id, in a transaction. Texts are looked at during the call only; a time that isn't a
-  // number is stored as 0.
-  [[nodiscard]] Status append(const StoredEvent& event);
+  // number is stored as 0. `repeatsPayload`: its payload is that of the append before. The session is that of `owner`.
+  [[nodiscard]] Status append(const StoredEvent& event, bool repeatsPayload, platform::SessionNumber owner);
   // The same for an event that another file held, with its id and the time of its group. Ids rise; none is above that
   // of an event of ours. An id that is there already is replaced by the same.
-  [[nodiscard]] Status carry(std::int64_t id, double seconds, const StoredEvent& event);
+  [[nodiscard]] Status carry(std::int64_t id, double seconds, const StoredEvent& event, bool repeatsPayload);
   // Notes ids that were committed once and are in no file now, so that nobody looks for them again; in a transaction.
   [[nodiscard]] Status noteLoss(const IdRange& lost);
   // What was carried begins with this id, and whoever reads along goes on after the last one. In a transaction, after
   // the last carry().
   [[nodiscard]] Status noteCarried(std::int64_t first);
+  // Takes over the rows of runs, sessions and periods that another file has, as far as they can be read. In a
+  // transaction, after the last carry().
+  [[nodiscard]] Status carrySessions(Connection& from);
   // Removes what retention doesn't keep, until `deadline` at the latest; in a transaction, after its appends.
   [[nodiscard]] Status expire(std::chrono::steady_clock::time_point deadline);
   // Ends the transaction and synchronises it: what was appended is safe when this succeeds.
@@ -97,6 +110,8 @@ class EventFile {
   // The last id of events that were expected in a file that holds nothing; 0 for none. Told once. They may be in a file
   // that somebody took away.
   std::int64_t takeGoneUpTo() noexcept { return std::exchange(goneUpTo_, 0); }
+  // How many events open() brought over from the layout of an older recorder, where it found one. Told once.
+  std::optional<std::int64_t> takeMigrated() noexcept { return std::exchange(migrated_, std::nullopt); }
   // What was put out of the way to open the file, by its new name.
   std::vector<std::string> takePutAside() noexcept { return files_.takePutAside(); }
 
@@ -126,10 +141,15 @@ class EventFile {
 
  private:
   [[nodiscard]] Status checkLog();
-  [[nodiscard]] Status insertAs(std::int64_t id, const StoredEvent& event, Statement& statement);
+  [[nodiscard]] Status insertAs(std::int64_t id, const StoredEvent& event, bool repeatsPayload, bool replacing);
+  // The answer to a step of a transaction, which is rolled back where it failed.
+  [[nodiscard]] Status rollbackAfter(int code);
+  void rollback();
   [[nodiscard]] int writeGroup();
   [[nodiscard]] Status openConnection();
   [[nodiscard]] Status checkContent();
+  [[nodiscard]] Status migrateOlder();
+  [[nodiscard]] Status openTime() { return time_.open(connection_); }
   // What the file holds of a commit that failed, made safe before it counts.
   [[nodiscard]] Status settleDoubt();
   [[nodiscard]] Status prepareStatements();
@@ -140,12 +160,12 @@ class EventFile {
   Checkpointer checkpointer_;
   // Prepared once for each opening: these run with every commit, or every event.
   Statement begin_;
-  Statement insert_;
-  Statement carry_;
   Statement keepLastId_;
   Statement commit_;
   Statement insertGroup_;
   // What runs inside the transactions, on this connection.
+  EventTable table_;
+  SessionTable sessions_;
   Retention retention_;
   StoreCheck check_{connection_};
   RecorderTime time_;
@@ -160,6 +180,8 @@ class EventFile {
   std::int64_t expected_ = 0;   // that the file holds, before it was opened
   std::int64_t goneUpTo_ = 0;
   std::optional<IdRange> missing_;
+  std::optional<std::int64_t> migrated_;
+  bool runBegun_ = false;  // in the file that is open
   std::int64_t pageBytes_ = 8192;
   std::int64_t logLimit_ = std::int64_t{8} << 20;
   bool bringInFailed_ = false;  // the last time that the log was to be brought in, whatever was opened since

@@ -1,6 +1,6 @@
 #include "recorder/store/EventGroup.h"
 
-#include "recorder/store/RowHash.h"
+#include "recorder/store/files/RowHash.h"
 
 namespace tarn::recorder {
 
@@ -32,6 +32,9 @@ std::uint64_t hashOf(std::int64_t id, const StoredEvent& event) noexcept {
   hash.add(event.name);
   hash.add(event.payload);
   hash.add(event.detail);
+  if (event.session != 0) {
+    hash.add(static_cast<std::uint64_t>(event.session));
+  }
   return hash.value();
 }
 

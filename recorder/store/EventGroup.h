@@ -24,9 +24,12 @@ struct StoredEvent {
   std::string_view name;
   std::string_view payload;
   std::string_view detail;
+  // The row of `sessions` on whose behalf it was handed over, 0 for none.
+  std::int64_t session = 0;
 };
 
-// The checksum of a row: its id and all its columns, in their order.
+// The checksum of a row: its id and all its columns, in their order, the session only where there is one: rows that
+// are older than sessions keep theirs.
 std::uint64_t hashOf(std::int64_t id, const StoredEvent& event) noexcept;
 
 class EventGroup {

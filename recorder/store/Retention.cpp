@@ -4,6 +4,8 @@
 
 #include <algorithm>
 
+#include "recorder/store/EventTable.h"
+
 namespace tarn::recorder {
 
 namespace {
@@ -18,46 +20,39 @@ constexpr std::int64_t kReserveShare = 16;
 
 int Retention::prepare(Connection& connection) {
   connection_ = &connection;
-  sqlite3* const database = connection.handle();
-  int code = oldest_.prepare(database, "SELECT id FROM events ORDER BY id LIMIT 1", true);
-  if (code == SQLITE_OK) {
-    code = pageCount_.prepare(database, "PRAGMA page_count", true);
-  }
-  if (code == SQLITE_OK) {
-    code = freePages_.prepare(database, "PRAGMA freelist_count", true);
-  }
-  if (code == SQLITE_OK) {
-    code = removeBefore_.prepare(database, "DELETE FROM events WHERE id < ?1", true);
-  }
-  if (code == SQLITE_OK) {
-    code = groupTimes_.prepare(database, "SELECT first, seconds FROM event_groups ORDER BY first", true);
-  }
-  // The group in which the bound lies stays.
-  if (code == SQLITE_OK) {
-    code = removeGroups_.prepare(
-        database, "DELETE FROM event_groups WHERE first < (SELECT max(first) FROM event_groups WHERE first <= ?1)",
-        true);
-  }
-  if (code == SQLITE_OK) {
-    code = removeLosses_.prepare(database, "DELETE FROM recorder_losses WHERE last < ?1", true);
-  }
-  if (code == SQLITE_OK) {
-    code =
-        keepHoldsAfter_.prepare(database, "INSERT OR REPLACE INTO recorder_state VALUES('holds_after', ?1 - 1)", true);
+  const struct {
+    Statement& statement;
+    const char* sql;
+  } all[] = {
+      {oldest_, "SELECT id FROM event_rows ORDER BY id LIMIT 1"},
+      {pageCount_, "PRAGMA page_count"},
+      {freePages_, "PRAGMA freelist_count"},
+      {groupTimes_, "SELECT first, seconds FROM event_groups ORDER BY first"},
+      {removeBefore_, "DELETE FROM event_rows WHERE id < ?1"},
+      // Texts that a row after them still names stay; such a row isn't far.
+      {removeTexts_,
+       "DELETE FROM event_texts WHERE id < 2 * ?1 AND id NOT IN "
+       "(SELECT 2 * (id - kind) + 1 FROM event_rows WHERE id >= ?1 AND id < ?1 + ?2 AND id - kind < ?1 UNION ALL "
+       "SELECT 2 * (id - payload) FROM event_rows WHERE id >= ?1 AND id < ?1 + ?3 AND id - payload < ?1)"},
+      {removeSpans_, "DELETE FROM session_spans WHERE first <= ?1 - ?2"},
+      {removeTimes_, "DELETE FROM event_times WHERE block < ?1 >> ?2"},
+      // The group in which the bound lies stays.
+      {removeGroups_, "DELETE FROM event_groups WHERE first < (SELECT max(first) FROM event_groups WHERE first <= ?1)"},
+      {removeLosses_, "DELETE FROM recorder_losses WHERE last < ?1"},
+      {keepHoldsAfter_, "INSERT OR REPLACE INTO recorder_state VALUES('holds_after', ?1 - 1)"},
+  };
+  for (const auto& [statement, sql] : all) {
+    if (const int code = statement.prepare(connection.handle(), sql, true); code != SQLITE_OK) return code;
   }
   pageBytes_ = connection.integer("PRAGMA page_size").value_or(4096);
-  return code;
+  return SQLITE_OK;
 }
 
 void Retention::finalize() noexcept {
-  oldest_.finalize();
-  pageCount_.finalize();
-  freePages_.finalize();
-  groupTimes_.finalize();
-  removeBefore_.finalize();
-  removeGroups_.finalize();
-  removeLosses_.finalize();
-  keepHoldsAfter_.finalize();
+  for (Statement* const statement : {&oldest_, &pageCount_, &freePages_, &groupTimes_, &removeBefore_, &removeTexts_,
+                                     &removeSpans_, &removeTimes_, &removeGroups_, &removeLosses_, &keepHoldsAfter_}) {
+    statement->finalize();
+  }
 }
 
 int Retention::readOldest(std::int64_t& id, bool& any) {
@@ -95,14 +90,14 @@ int Retention::removeBefore(std::int64_t id, std::uint64_t& removed) {
   int code = removeBefore_.bind(1, id).run();
   if (code != SQLITE_OK) return code;
   removed += static_cast<std::uint64_t>(sqlite3_changes64(connection_->handle()));
-  code = removeGroups_.bind(1, id).run();
-  if (code == SQLITE_OK) {
-    code = removeLosses_.bind(1, id).run();
+  removeTexts_.bind(2, EventTable::kReach).bind(3, EventTable::kPayloadReach);
+  removeSpans_.bind(2, EventTable::kReach);
+  removeTimes_.bind(2, std::int64_t{EventTable::kBlockBits});
+  for (Statement* const statement :
+       {&removeTexts_, &removeSpans_, &removeTimes_, &removeGroups_, &removeLosses_, &keepHoldsAfter_}) {
+    if (code = statement->bind(1, id).run(); code != SQLITE_OK) return code;
   }
-  if (code == SQLITE_OK) {
-    code = keepHoldsAfter_.bind(1, id).run();
-  }
-  return code;
+  return SQLITE_OK;
 }
 
 int Retention::readPragma(Statement& pragma, std::int64_t& value) {

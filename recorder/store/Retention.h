@@ -33,6 +33,10 @@ class Retention {
 
   // As what lies beside the database takes more or less of the cap; holds from the next expire() on.
   void setMaxBytes(std::int64_t maxBytes) noexcept { limits_.maxBytes = maxBytes; }
+  // For sessions whose events are gone: how old their rows get, and how many there may be, so that they take a
+  // thirtieth of the limit or so.
+  double maxAgeSeconds() const noexcept { return limits_.maxAgeSeconds; }
+  std::int64_t mostSessions() const noexcept { return limits_.maxBytes / kBytesASession; }
   // Gets ready for a connection, which outlives it until finalize(). SQLite's result code.
   [[nodiscard]] int prepare(Connection& connection);
   // Lets go of the connection's statements; safe without any.
@@ -47,12 +51,14 @@ class Retention {
   bool hasMore() const noexcept { return hasMore_; }
 
  private:
+  static constexpr std::int64_t kBytesASession = 8192;
+
   // The lowest id; `any` is false in an empty file.
   [[nodiscard]] int readOldest(std::int64_t& id, bool& any);
   // Where the events that are too old end, by their groups; at most `atMost`.
   [[nodiscard]] int readAgedBefore(double cutoff, std::int64_t atMost, std::int64_t& before);
-  // Removes the events before this id, with their groups and noted losses, and notes that the file holds what comes
-  // after.
+  // Removes the events before this id, with their groups and noted losses and with the texts that no later event
+  // shares, and notes that the file holds what comes after.
   [[nodiscard]] int removeBefore(std::int64_t id, std::uint64_t& removed);
   [[nodiscard]] int readPragma(Statement& pragma, std::int64_t& value);
   // Of the file, and of its pages in use.
@@ -71,6 +77,9 @@ class Retention {
   Statement freePages_;
   Statement groupTimes_;
   Statement removeBefore_;
+  Statement removeTexts_;
+  Statement removeSpans_;
+  Statement removeTimes_;
   Statement removeGroups_;
   Statement removeLosses_;
   Statement keepHoldsAfter_;

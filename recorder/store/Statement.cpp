@@ -26,6 +26,11 @@ Statement& Statement::bind(int place, double value) noexcept {
   return *this;
 }
 
+Statement& Statement::bindNull(int place) noexcept {
+  sqlite3_bind_null(statement_, place);
+  return *this;
+}
+
 Statement& Statement::bindBytes(int place, std::string_view bytes) noexcept {
   sqlite3_bind_blob64(statement_, place, bytes.data(), bytes.size(), nullptr /* SQLITE_STATIC */);
   return *this;

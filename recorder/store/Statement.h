@@ -31,6 +31,7 @@ class Statement {
   Statement& bind(int place, std::int64_t value) noexcept;
   Statement& bind(int place, double value) noexcept;
   Statement& bind(int place, std::string_view text) noexcept;
+  Statement& bindNull(int place) noexcept;
   Statement& bindBytes(int place, std::string_view bytes) noexcept;
 
   // One step: SQLITE_ROW, SQLITE_DONE or what went wrong. After a row the next step goes on; after anything else it
@@ -41,6 +42,9 @@ class Statement {
   // Runs to the end and resets: SQLITE_OK or what went wrong. Rows are passed over. For statements that change
   // something.
   [[nodiscard]] int run() noexcept;
+
+  // For calls that have no operation here. It stays this object's.
+  sqlite3_stmt* handle() const noexcept { return statement_; }
 
   // Of the row of the last step. Columns count from 0. A text lives until the next step.
   bool isNull(int column) const noexcept;

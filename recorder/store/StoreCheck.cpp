@@ -17,7 +17,8 @@ constexpr int kMostStrides = 1'000'000;
 
 // Whether the row has the kinds of values that the recorder writes; other kinds may have the same bytes.
 bool isAsWritten(const Statement& row) noexcept {
-  return row.isReal(1) && row.isText(2) && row.isText(3) && row.isText(4) && row.isText(5);
+  const bool hasSession = row.isNull(6) || row.integer(6) != 0;
+  return row.isReal(1) && row.isText(2) && row.isText(3) && row.isText(4) && row.isText(5) && hasSession;
 }
 
 }  // namespace
@@ -67,9 +68,8 @@ Status StoreCheck::begin() {
   int code = groups_.prepare(connection_.handle(),
                              "SELECT first, seconds, hashes FROM event_groups WHERE first >= ?1 - 63 ORDER BY first");
   if (code == SQLITE_OK) {
-    code = rows_.prepare(connection_.handle(),
-                         "SELECT id, time, backend, name, payload, detail FROM events WHERE id >= ?1 AND id < ?2 "
-                         "ORDER BY id");
+    const std::string rows(selectEvents(connection_).sql);
+    code = rows_.prepare(connection_.handle(), rows + " WHERE r.id >= ?1 AND r.id < ?2 ORDER BY r.id");
   }
   done_ = code != SQLITE_OK;
   return connection_.errorOf(code);
@@ -142,7 +142,7 @@ Status StoreCheck::lookAtRows(std::int64_t first, std::int64_t end, const EventG
 }
 
 void StoreCheck::lookAtRow(std::int64_t id, const EventGroup* group) {
-  const StoredEvent event{rows_.real(1), rows_.text(2), rows_.text(3), rows_.text(4), rows_.text(5)};
+  const StoredEvent event{rows_.real(1), rows_.text(2), rows_.text(3), rows_.text(4), rows_.text(5), rows_.integer(6)};
   if (!isAsWritten(rows_) || (group != nullptr && hashOf(id, event) != group->hash(id))) {
     lose(id, id + 1);
   } else if (group == nullptr) {

@@ -5,8 +5,8 @@
 #include <system_error>
 
 #include "recorder/store/Connection.h"
-#include "recorder/store/Remedy.h"
 #include "recorder/store/StoreLayout.h"
+#include "recorder/store/files/Remedy.h"
 
 namespace tarn::recorder {
 
@@ -48,17 +48,14 @@ Result<StoreReport> inspectStore(const std::filesystem::path& file) {
   StoreReport report;
   if (auto error = open(connection, file, report.damage); error.failed()) return {{}, error};
   if (auto error = connection.errorOf(connection.run("BEGIN")); error.failed()) return {{}, error};
-  if (auto error = checkPages(connection); error.failed()) {
+  if (auto error = checkPages(connection, true); error.failed()) {
     if (remedyFor(error->code) != Remedy::SetAside) return {{}, error};
     report.damage = report.damage.empty() ? error->text : report.damage;
   }
   // No checksum holds the text that makes the tables what they are.
-  bool hasState = false;
-  if (auto error = checkColumns(connection, hasState); error.failed() && report.damage.empty()) {
-    report.damage = error->text;
-  }
-  if (auto error = checkNotes(connection); error.failed() && report.damage.empty()) {
-    report.damage = error->text;
+  if (auto error = checkSchema(connection); error.failed()) {
+    if (remedyFor(error->code) != Remedy::SetAside) return {{}, error};
+    report.damage = report.damage.empty() ? error->text : report.damage;
   }
   StoreCheck check(connection);
   check.tolerateDamage();

@@ -22,7 +22,7 @@ namespace tarn {
 struct TarnReportingRtcSummary {
   // A payload has its limits, and so does what takes it in: after so many bytes of keys and values no more messages
   // are added. On its way to the disk an event is in memory several times, and as JSON a byte may become six.
-  static constexpr std::size_t kLongestText = std::size_t{128} << 20U;
+  static constexpr std::size_t kLongestText = std::size_t{16} << 20U;
 
   // "Tarn_Session_Summary_Event" is the number of the service type; every other value is the text of a list with
   // commas.

@@ -115,9 +115,11 @@ TEST_F(RecorderFile, CheckTellsWhatIsLostByItsIdAndNeedsNoService) {
   EXPECT_GE(count, 2U);
   ASSERT_EQ(stopService(SIGTERM), 0);
   std::string bytes = contentOf(database());
-  const std::size_t at = bytes.rfind("Playback.Start");
-  ASSERT_NE(at, std::string::npos);
-  bytes[at] = 'p';
+  std::size_t found = 0;
+  for (std::size_t at = 0; (at = bytes.find("Playback.Start", at)) != std::string::npos; ++found) {
+    bytes[at] = 'p';
+  }
+  ASSERT_GT(found, 0U);
   writeFile(database(), bytes);
   const Finished alone = ctl({"check", "--store"});
   EXPECT_EQ(alone.status, 1);

@@ -10,6 +10,7 @@
 #include <thread>
 
 #include "host/machine/LinuxClock.h"
+#include "platform/SessionRecords.h"
 #include "platform/TarnReportingServiceProtocol.h"
 #include "testing/RecordingLog.h"
 #include "tests/host/Eventually.h"
@@ -350,6 +351,7 @@ TEST_F(LinuxPlatformTest, HandsOutEverythingThatAMachineHasOnTheConfiguredPaths)
   EXPECT_TRUE(facilities.wattlog && facilities.pylon && facilities.snare && facilities.tattle && facilities.gyre);
   EXPECT_TRUE(facilities.flume && facilities.rtcReporting && facilities.performanceTrace);
   EXPECT_TRUE(facilities.traceAnalysis && facilities.perfDataWriters && facilities.signposts);
+  EXPECT_TRUE(facilities.sessionRecords);
   EXPECT_FALSE(facilities.accessories);
 }
 
@@ -360,12 +362,38 @@ TEST_F(LinuxPlatformTest, WithoutTheRecorderNothingStandsInAndNothingIsWritten) 
   ASSERT_EQ(listen(), "");
   const platform::Facilities& facilities = platform_->facilities();
   EXPECT_FALSE(facilities.wattlog || facilities.pylon || facilities.snare || facilities.tattle || facilities.gyre);
-  EXPECT_FALSE(facilities.rtcReporting);
+  EXPECT_FALSE(facilities.rtcReporting || facilities.sessionRecords);
   EXPECT_TRUE(facilities.flume && facilities.performanceTrace && facilities.signposts);
   EXPECT_FALSE(facilities.tally.eventIsInUse("sys.oxbow.tarnkit.Playback.Start"));
   facilities.tally.sendEventLazy("event", [] { return plist::Dictionary(); });
   end();
   EXPECT_FALSE(std::filesystem::exists(folder_.path("recorder.sqlite3")));
+}
+
+// At once, from a worker's own queue, put off, and nobody's in between.
+TEST_F(LinuxPlatformTest, AnEventIsThatOfTheSessionForWhichItWasHandedOver) {
+  make();
+  ASSERT_EQ(platform_->start().text(), "");
+  platform::SessionRecords& records = *platform_->facilities().sessionRecords;
+  const auto queue = platform_->facilities().workQueues.makeSerialQueue("own", platform::QualityOfService::Utility);
+  for (const std::string name : {"a", "b"}) {
+    platform::SessionFacts facts;
+    facts.process = name;
+    const platform::SessionScope scope(&records, records.created(facts));
+    record(name);
+    queue->async([this, name] { record(name + " queued"); });
+    queue->asyncAfter(1ms, [this, name] { record(name + " delayed"); });
+  }
+  record("nobody's");
+  std::promise<void> over;
+  queue->asyncAfter(20ms, [&over] { over.set_value(); });
+  over.get_future().wait();
+  end();
+  EXPECT_EQ(recorder::ask(folder_.path("recorder.sqlite3"),
+                          "SELECT events.name || ': ' || coalesce(sessions.process, '-') FROM events "
+                          "LEFT JOIN sessions ON sessions.id = events.session ORDER BY events.name"),
+            (std::vector<std::string>{"a: a", "a delayed: a", "a queued: a", "b: b", "b delayed: b", "b queued: b",
+                                      "nobody's: -"}));
 }
 
 TEST_F(LinuxPlatformTest, TemporaryFolderThatCannotBeMadeFailsTheStart) {

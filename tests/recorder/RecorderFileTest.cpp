@@ -121,16 +121,16 @@ TEST_F(RecorderFileTest, AViewOfThatNameIsSetAside) {
 }
 
 TEST_F(RecorderFileTest, ATableThatRefusesOurRowsIsSetAside) {
-  change(file(),
-         "CREATE TABLE events(id INTEGER PRIMARY KEY, time REAL, backend TEXT, name TEXT CHECK (name = 'no'),"
-         " payload TEXT, detail TEXT)");
+  start();
+  stop();
+  change(file(), "CREATE TRIGGER refusal BEFORE INSERT ON event_rows BEGIN SELECT RAISE(ABORT, 'not this one'); END");
   expectSetAside();
 }
 
 TEST_F(RecorderFileTest, IdsThatLeaveNoRoomAreSetAside) {
   start();
   stop();
-  change(file(), "INSERT INTO events(id) VALUES(9223372036854775807)");
+  change(file(), "INSERT INTO event_rows(id) VALUES(9223372036854775807)");
   expectSetAside();
 }
 
@@ -168,8 +168,9 @@ TEST_F(RecorderFileTest, DamageFoundWhileRunningMovesOnToAFreshFile) {
     recordMany(1000, 1000);
     ASSERT_TRUE(flush());
   }
-  // After the first pages, which are always at hand, and far from the newest ones; retention comes by here first.
-  overwrite(file(), 10 * 8192, 2 << 20);
+  // After the first pages, which say what the tables are and are always at hand, and far from the newest ones;
+  // retention comes by here first.
+  overwrite(file(), 24 * 8192, 2 << 20);
   for (int round = 0; round < 10; ++round) {
     recordMany(1000, 1000);
     ASSERT_TRUE(flush());
@@ -192,7 +193,7 @@ TEST_F(RecorderFileTest, ADroppedTableMovesOnToAFreshFile) {
   start();
   record("before");
   ASSERT_TRUE(flush());
-  change(file(), "DROP TABLE events");
+  change(file(), "DROP TABLE event_rows");
   record("after");
   ASSERT_TRUE(flush());
   EXPECT_EQ(errors(), 1U);

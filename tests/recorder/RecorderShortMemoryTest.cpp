@@ -5,6 +5,7 @@
 #include <vector>
 
 #include "recorder/LateReplies.h"
+#include "recorder/RecorderSessionRecords.h"
 #include "recorder/store/files/StateUsage.h"
 #include "testing/ManualWorkQueues.h"
 #include "tests/recorder/RecorderFixture.h"
@@ -96,6 +97,28 @@ TEST_F(RecorderShortMemory, WhatIsSettledDoesNotWaitForAnEventThatWasNotTaken) {
   ASSERT_TRUE(eventually([&] { return queue->waiting() == 1; }));
   queues.runUntilIdle();
   EXPECT_TRUE(settled);
+}
+
+TEST_F(RecorderShortMemory, ANoteThatThereIsNoneForIsThrownAndWasNotMade) {
+  options_.highWaterEvents = 1;
+  gatherForLong();
+  RecorderSessionRecords records(start(), clock_, [](platform::SessionNumber session) noexcept { return session; });
+  recorder_->waitUntilOpened();
+  platform::SessionFacts facts;
+  facts.process = std::string(1000, 'p');
+  bool thrown = false;
+  {
+    const FailingAllocations failing(1, FailingAllocations::kAll);
+    try {
+      records.created(facts);
+    } catch (const std::bad_alloc&) {
+      thrown = true;
+    }
+  }
+  EXPECT_TRUE(thrown);
+  EXPECT_EQ(records.created(facts), 1);
+  ASSERT_TRUE(flush());
+  EXPECT_EQ(askOne(file(), "SELECT count(*), max(id) FROM sessions"), "1|1");
 }
 
 // The writer's allocations, SQLite's own among them, fail one after the other.

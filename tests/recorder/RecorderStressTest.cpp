@@ -1,7 +1,7 @@
 // Many threads at once: nothing is lost, each thread's order is kept, and the account is right at any moment.
 #include <atomic>
 
-#include "recorder/store/EventReader.h"
+#include "recorder/store/reading/EventReader.h"
 #include "tests/recorder/RecorderFixture.h"
 
 namespace tarn::recorder {

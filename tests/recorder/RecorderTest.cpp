@@ -12,13 +12,20 @@ namespace {
 
 using RecorderTest = RecorderFixture;
 
-TEST_F(RecorderTest, TableIsExactlyTheAgreedOne) {
+TEST_F(RecorderTest, ColumnsAreExactlyTheAgreedOnes) {
   start();
   ASSERT_TRUE(flush());
   stop();
+  const auto columnsOf = [this](const std::string& table) {
+    return askOne(file(), "SELECT group_concat(name) FROM pragma_table_info('" + table + "')");
+  };
+  EXPECT_EQ(columnsOf("events"), "id,time,backend,name,payload,detail,session");
+  EXPECT_EQ(columnsOf("runs"), "id,boot,version,started,ended,end_reason");
   EXPECT_EQ(
-      askOne(file(), "SELECT sql FROM sqlite_schema WHERE name = 'events'"),
-      "CREATE TABLE events(id INTEGER PRIMARY KEY, time REAL, backend TEXT, name TEXT, payload TEXT, detail TEXT)");
+      columnsOf("sessions"),
+      "id,run,reporter,connection,pid,uid,process,application,service_type,service_name,created,ended,end_reason");
+  EXPECT_EQ(columnsOf("periods"), "id,session,started,stopped,messages,redundant,first_event,last_event");
+  EXPECT_EQ(askOne(file(), "PRAGMA user_version"), "1");
 }
 
 TEST_F(RecorderTest, FileIsInWriteAheadMode) {

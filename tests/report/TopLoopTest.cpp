@@ -4,7 +4,7 @@
 
 #include <deque>
 
-#include "tools/ctl/Output.h"
+#include "tools/ctl/terminal/Output.h"
 
 namespace tarn::ctl {
 namespace {

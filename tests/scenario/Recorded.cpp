@@ -12,7 +12,7 @@
 #include <utility>
 
 #include "plist/formats/Json.h"
-#include "recorder/store/EventReader.h"
+#include "recorder/store/reading/EventReader.h"
 
 namespace tarn::scenario {
 

@@ -2,7 +2,7 @@
 
 #include <gtest/gtest.h>
 
-#include "tools/ctl/Output.h"
+#include "tools/ctl/terminal/Output.h"
 
 namespace tarn::ctl {
 namespace {

@@ -12,7 +12,7 @@
 #include "host/system/UniqueDescriptor.h"
 #include "tests/host/InChild.h"
 #include "tests/host/TemporaryFolder.h"
-#include "tools/ctl/Output.h"
+#include "tools/ctl/terminal/Output.h"
 
 namespace tarn::ctl {
 namespace {

@@ -7,7 +7,7 @@
 
 #include "recorder/store/StoreReport.h"
 #include "tools/ctl/Command.h"
-#include "tools/ctl/Output.h"
+#include "tools/ctl/terminal/Output.h"
 
 namespace tarn::ctl {
 

@@ -7,8 +7,8 @@
 #include "host/settings/JsonDefaultsStore.h"
 #include "host/system/JsonValues.h"
 #include "tools/ctl/Command.h"
-#include "tools/ctl/Output.h"
 #include "tools/ctl/SilentLog.h"
+#include "tools/ctl/terminal/Output.h"
 
 namespace tarn::ctl {
 

@@ -7,7 +7,7 @@
 #include "plist/CalendarDate.h"
 #include "plist/EscapedText.h"
 #include "plist/formats/Json.h"
-#include "tools/ctl/Output.h"
+#include "tools/ctl/terminal/Output.h"
 
 namespace tarn::ctl {
 

@@ -3,7 +3,7 @@
 
 #include <string>
 
-#include "recorder/store/EventReader.h"
+#include "recorder/store/reading/EventReader.h"
 
 namespace tarn::ctl {
 

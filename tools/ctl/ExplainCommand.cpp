@@ -12,8 +12,8 @@
 
 #include "dictionary/MessageDictionary.h"
 #include "tools/ctl/Command.h"
-#include "tools/ctl/Output.h"
 #include "tools/ctl/SimilarNames.h"
+#include "tools/ctl/terminal/Output.h"
 
 namespace tarn::ctl {
 

@@ -12,7 +12,7 @@
 #include "tools/ctl/Command.h"
 #include "tools/ctl/InputFile.h"
 #include "tools/ctl/MessageLint.h"
-#include "tools/ctl/Output.h"
+#include "tools/ctl/terminal/Output.h"
 #include "tools/script/ScriptLines.h"
 #include "tools/script/ScriptParser.h"
 

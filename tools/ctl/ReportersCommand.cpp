@@ -3,8 +3,8 @@
 #include <CLI/CLI.hpp>
 
 #include "tools/ctl/Command.h"
-#include "tools/ctl/Output.h"
 #include "tools/ctl/ServiceConnection.h"
+#include "tools/ctl/terminal/Output.h"
 
 namespace tarn::ctl {
 

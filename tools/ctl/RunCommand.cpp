@@ -9,8 +9,8 @@
 #include "host/system/SystemError.h"
 #include "tools/ctl/Command.h"
 #include "tools/ctl/InputFile.h"
-#include "tools/ctl/Output.h"
 #include "tools/ctl/ScriptPlayer.h"
+#include "tools/ctl/terminal/Output.h"
 #include "wire/Request.h"
 
 namespace tarn::ctl {

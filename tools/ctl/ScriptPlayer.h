@@ -18,8 +18,8 @@
 #include <string_view>
 
 #include "client/ClientConnection.h"
-#include "tools/ctl/Output.h"
 #include "tools/ctl/ServiceConnection.h"
+#include "tools/ctl/terminal/Output.h"
 #include "tools/script/ScriptLines.h"
 #include "tools/script/ScriptStep.h"
 

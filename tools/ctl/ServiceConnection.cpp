@@ -6,7 +6,7 @@
 #include <thread>
 
 #include "plist/ValueView.h"
-#include "tools/ctl/Output.h"
+#include "tools/ctl/terminal/Output.h"
 
 namespace tarn::ctl {
 

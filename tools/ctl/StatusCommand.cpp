@@ -5,8 +5,8 @@
 
 #include "plist/formats/Json.h"
 #include "tools/ctl/Command.h"
-#include "tools/ctl/Output.h"
 #include "tools/ctl/ServiceConnection.h"
+#include "tools/ctl/terminal/Output.h"
 
 namespace tarn::ctl {
 

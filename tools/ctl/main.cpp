@@ -12,7 +12,7 @@
 
 #include "host/settings/HostPaths.h"
 #include "tools/ctl/Command.h"
-#include "tools/ctl/Output.h"
+#include "tools/ctl/terminal/Output.h"
 
 namespace tarn::ctl {
 

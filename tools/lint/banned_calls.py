@@ -14,7 +14,8 @@ TRIALS = ("tests/*", "bench/*", "fuzz/*")
 # Where time is the real one: real programs, the real machine's folders, and two adapters that have nothing to wait on.
 REAL_TIME = ("tests/e2e/*", "tests/scenario/*", "tests/host/*", "tests/recorder/*", "tests/client/*",
              "tests/clients/*", "tests/campaigns/shim/RingPoster.cpp", "clients/c/src/Client.cpp",
-             "tests/*Stress*", "bench/*", "tools/*", "host/system/FileLock.cpp", "recorder/store/EventReader.cpp")
+             "tests/*Stress*", "bench/*", "tools/*", "host/system/FileLock.cpp",
+             "recorder/store/reading/EventReader.cpp")
 # A fatal check on our own mistakes, where there is no log yet or no longer.
 LAST_WORDS = ("service/vocabulary/ProcessState.cpp", "service/vocabulary/TarnReportingServerQueue.cpp", "testing/*")
 # Locks that clang doesn't check: what the checked ones are made of; those of the fakes, the tools and the tests, which

@@ -19,7 +19,7 @@ GROUND = BASE + ("host/system", "host/log")
 HOST = ("host/system", "host/log", "host/loop", "host/socket", "host/settings", "host/machine", "host/drivers",
         "host/ring", "host/traces", "host/traces/analysis")
 # The recorder's database, and what lies beside it.
-STORE = ("recorder/store", "recorder/store/files")
+STORE = ("recorder/store", "recorder/store/files", "recorder/store/reading")
 PROGRAM = SESSION + WORKERS + ("service", "wire", "recorder") + STORE + HOST + ("host",)
 
 # Each folder, from the ground up, and what its files may include beside files of its own. The worker families don't
@@ -45,6 +45,7 @@ ROOMS = {
     "service": SESSION + WORKERS,
     "recorder/store/files": BASE,
     "recorder/store": BASE + ("recorder/store/files",),
+    "recorder/store/reading": BASE + ("recorder/store/files", "recorder/store"),
     "recorder": BASE + ("service/vocabulary",) + STORE,
     "host/system": BASE,
     "host/log": BASE + ("host/system",),
@@ -62,13 +63,13 @@ ROOMS = {
     "testing": BASE + ("service/vocabulary", "testing/backends"),
     "tools/script": PROGRAM,
     "tools/mutate": (),
-    "tools/report": VALUES + ("host/system", "recorder/store"),
-    "tools/ctl/terminal": PROGRAM + ("tools/ctl",),
+    "tools/report": VALUES + ("host/system",) + STORE,
+    "tools/ctl/terminal": PROGRAM,
+    "tools/ctl": PROGRAM + ("client", "dictionary", "tools/script", "tools/ctl/terminal"),
     "tools/ctl/sessions": PROGRAM + ("tools/ctl", "tools/ctl/terminal", "tools/script"),
     "tools/ctl/views": PROGRAM + ("client", "tools/ctl", "tools/ctl/terminal", "tools/report"),
-    "tools/ctl": PROGRAM + ("client", "dictionary", "tools/script", "tools/ctl/sessions", "tools/ctl/terminal"),
     # What checks the service shares no code with it, but for the client and the reader of the recorder's file.
-    "tests/scenario": VALUES + ("client", "wire", "recorder/store"),
+    "tests/scenario": VALUES + ("client", "wire", "recorder/store", "recorder/store/reading"),
 }
 # Folders, with all below them, whose files may look at everything.
 TRIALS = ("tests", "bench", "fuzz", "examples")

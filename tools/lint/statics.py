@@ -11,12 +11,13 @@ from tree import Finding, code_only
 
 HOME = "service/vocabulary/ProcessState.cpp"
 PRODUCT = ("client/", "clients/", "derived/", "diagnostics/", "dictionary/", "host/", "platform/", "plist/",
-           "recorder/", "service/", "session/", "telemetry/", "testing/", "tools/ctl/", "tools/script/", "wire/")
+           "recorder/", "service/", "session/", "telemetry/", "testing/", "tools/ctl/", "tools/report/", "tools/script/",
+           "wire/")
 # (file, variable): why it can't live in the home.
 EXCEPTIONS = {
     ("plist/Key.cpp", "instance"): "one copy of each text that never changes; keys are made before main",
     ("plist/KeyList.cpp", "instance"): "one copy of each key list that never changes, likewise",
-    ("tools/ctl/EventsCommand.cpp", "stopRequested"): "a signal handler reaches nothing else",
+    ("tools/ctl/sessions/EventsCommand.cpp", "stopRequested"): "a signal handler reaches nothing else",
     ("tools/ctl/views/TopCommand.cpp", "stopRequested"): "a signal handler reaches nothing else",
     ("recorder/store/files/MappedGuard.cpp", "guarded"): "a signal handler reaches nothing else",
     ("recorder/store/files/MappedGuard.cpp", "once"): "the handler is installed once a process",

@@ -7,7 +7,7 @@
 #include <optional>
 #include <string>
 
-#include "recorder/store/SessionReader.h"
+#include "recorder/store/reading/SessionReader.h"
 
 namespace tarn::report {
 

@@ -1,8 +1,8 @@
 // StoreMoment: the recorder's file as it is at one moment, for questions about it.
 //
-// The file is opened read-only and may be written meanwhile; it isn't trusted (see recorder/store/StoreAccess.h). As
-// long as this is open the file's log can't begin anew, so it is made for one look and not kept. Owner: a reader.
-// Threads: one at a time. It may block on the disk.
+// The file is opened read-only and may be written meanwhile; it isn't trusted (see
+// recorder/store/reading/StoreAccess.h). As long as this is open the file's log can't begin anew, so it is made for one
+// look and not kept. Owner: a reader. Threads: one at a time. It may block on the disk.
 #pragma once
 
 #include <filesystem>
@@ -12,7 +12,7 @@
 #include "plist/Result.h"
 #include "recorder/store/Connection.h"
 #include "recorder/store/Statement.h"
-#include "recorder/store/StoreAccess.h"
+#include "recorder/store/reading/StoreAccess.h"
 
 namespace tarn::report {
 

@@ -42,7 +42,7 @@ class StoreFiles {
   // Of the log in which so many bytes were committed.
   [[nodiscard]] Result<LogState> lookAtLog(std::int64_t bytes);
   // Before a transaction, and in it. Where the log's index is cut, SQLite would take old pages for the newest.
-  void noteIndex() noexcept { indexBytes_ = indexBytes(); }
+  void noteIndex() { indexBytes_ = indexBytes(); }
   [[nodiscard]] Status checkIndex() const;
 
   // Gives the closed file and what belongs to it another name, which is the value.

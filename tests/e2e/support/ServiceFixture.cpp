@@ -3,7 +3,7 @@
 #include <csignal>
 
 #include "plist/formats/Json.h"
-#include "recorder/store/EventReader.h"
+#include "recorder/store/reading/EventReader.h"
 
 namespace tarn::e2e {
 

@@ -1,5 +1,5 @@
 // Whoever reads along is woken by writes to the file and what lies beside it under its name, and by nothing else.
-#include "recorder/store/ChangeWatch.h"
+#include "recorder/store/files/ChangeWatch.h"
 
 #include "tests/recorder/RecorderFixture.h"
 

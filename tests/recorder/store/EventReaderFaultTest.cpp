@@ -1,7 +1,7 @@
 // Files that hold no events of ours: what their schemas and pages say must cost no more than they are worth.
 #include <array>
 
-#include "recorder/store/EventReader.h"
+#include "recorder/store/reading/EventReader.h"
 #include "tests/recorder/RecorderFixture.h"
 
 namespace tarn::recorder {

@@ -1,4 +1,4 @@
-#include "recorder/store/EventReader.h"
+#include "recorder/store/reading/EventReader.h"
 
 #include <sys/stat.h>
 
@@ -7,6 +7,12 @@
 
 namespace tarn::recorder {
 namespace {
+
+thread_local std::int64_t worksFor = 0;
+
+std::int64_t currentSession() noexcept {
+  return worksFor;
+}
 
 class EventReaderTest : public RecorderFixture {
  protected:
@@ -82,6 +88,69 @@ TEST_F(EventReaderTest, EventsThatDoNotMatchAreNotLookedAtAgain) {
   EventQuery query;
   query.nameGlob = "none*";
   EXPECT_EQ(reader.read(query).value.lookedUpTo, 5);
+}
+
+// Over more events than are gone through one after the other, with names, sessions and times of all kinds.
+TEST_F(EventReaderTest, EveryQueryFindsInALargeFileWhatGoingThroughItFinds) {
+  options_.sessionOf = currentSession;
+  start();
+  for (int i = 0; i < 12'000; ++i) {
+    worksFor = i % 1000 < 900 ? 0 : i / 1000;
+    clock_.setEpochSeconds(1750000000.0 + (i / 2000 == 3 ? -500'000 : i));  // somebody set the clock, twice
+    record(i % 4000 == 3999 ? "rare" : "often" + std::to_string(i % 3));
+  }
+  worksFor = 0;
+  ASSERT_TRUE(flush());
+  const auto expectSame = [&](EventQuery query, const std::string& where) {
+    std::vector<std::string> found;
+    EventReader reader(file());
+    query.limit = 700;
+    for (bool more = true; more;) {
+      const Result<EventPage> page = reader.read(query);
+      ASSERT_TRUE(page.ok()) << page.error.text();
+      for (const EventRow& row : page.value.rows) {
+        found.push_back(std::to_string(row.id));
+      }
+      query.after = page.value.lookedUpTo;
+      more = page.value.more;
+    }
+    EXPECT_EQ(query.after, 12'000);
+    const auto wanted = ask(file(), "SELECT id FROM events WHERE " + where + " ORDER BY id");
+    EXPECT_FALSE(wanted.empty()) << where;
+    EXPECT_EQ(found, wanted) << where;
+  };
+  EventQuery query;
+  query.nameGlob = "r?re";
+  expectSame(query, "name = 'rare'");
+  query.nameGlob = "often1";
+  expectSame(query, "name = 'often1'");
+  query = {};
+  query.session = 9;
+  expectSame(query, "session = 9");
+  query.nameGlob = "often2";
+  expectSame(query, "session = 9 AND name = 'often2'");
+  query = {};
+  query.since = 1750010000.0;
+  expectSame(query, "time >= 1750010000.0");
+  query.until = 1750010100.0;
+  expectSame(query, "time >= 1750010000.0 AND time < 1750010100.0");
+  query.since.reset();
+  query.until = 1749999999.0;
+  expectSame(query, "time < 1749999999.0");
+}
+
+TEST_F(EventReaderTest, ARowTellsItsSession) {
+  options_.sessionOf = currentSession;
+  start();
+  record("nobody's");
+  worksFor = 3;
+  record("a session's");
+  worksFor = 0;
+  ASSERT_TRUE(flush());
+  const Result<EventPage> page = EventReader(file()).read({});
+  ASSERT_EQ(page.value.rows.size(), 2U);
+  EXPECT_EQ(page.value.rows[0].session, std::nullopt);
+  EXPECT_EQ(page.value.rows[1].session, 3);
 }
 
 TEST_F(EventReaderTest, AMissingFileIsToldAndIsReadOnceItIsThere) {
@@ -180,9 +249,9 @@ TEST_F(EventReaderTest, AFailureInBetweenRepeatsNothing) {
   EventReader reader(file());
   EventQuery query;
   query.after = reader.read(query).value.lookedUpTo;
-  change(file(), "ALTER TABLE events RENAME COLUMN name TO other");
+  change(file(), "ALTER TABLE event_texts RENAME COLUMN name TO other");
   EXPECT_TRUE(reader.read(query).failed());
-  change(file(), "ALTER TABLE events RENAME COLUMN other TO name");
+  change(file(), "ALTER TABLE event_texts RENAME COLUMN other TO name");
   const Result<EventPage> result = reader.read(query);
   EXPECT_TRUE(result.ok()) << result.error.text();
   EXPECT_EQ(names(result), Names{});

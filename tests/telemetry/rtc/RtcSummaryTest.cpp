@@ -233,8 +233,8 @@ TEST_F(RtcSummary, IsCutAtItsLimitBetweenTwoMessages) {
   EXPECT_EQ(TarnReportingMakeRtcSummary(AudioServiceType::Generic, logged(messages), 44).payload["b"].text(), "0,1,2");
 }
 
-TEST_F(RtcSummary, LimitLeavesRoomBelowTheLongestTextOfTheService) {
-  EXPECT_EQ(TarnReportingRtcSummary::kLongestText, 134'217'728U);
+TEST_F(RtcSummary, LimitLeavesRoomForTheCopiesOnTheWayToTheDisk) {
+  EXPECT_EQ(TarnReportingRtcSummary::kLongestText, 16'777'216U);
 }
 
 // A session that ran for long waits for its summary on a queue of its own, beside others that stop.

@@ -8,13 +8,13 @@
 
 #include "tools/ctl/Command.h"
 #include "tools/ctl/EventText.h"
-#include "tools/ctl/Output.h"
 #include "tools/ctl/sessions/SessionCommand.h"
 #include "tools/ctl/sessions/SessionEvents.h"
 #include "tools/ctl/sessions/SessionScript.h"
 #include "tools/ctl/sessions/SessionStory.h"
 #include "tools/ctl/sessions/SessionTable.h"
 #include "tools/ctl/sessions/SessionTrace.h"
+#include "tools/ctl/terminal/Output.h"
 
 namespace tarn::ctl {
 

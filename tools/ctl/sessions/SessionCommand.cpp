@@ -4,7 +4,7 @@
 #include <limits>
 #include <string>
 
-#include "tools/ctl/Output.h"
+#include "tools/ctl/terminal/Output.h"
 
 namespace tarn::ctl {
 

@@ -5,7 +5,7 @@
 #include <cstdint>
 #include <optional>
 
-#include "recorder/store/SessionReader.h"
+#include "recorder/store/reading/SessionReader.h"
 #include "tools/ctl/Command.h"
 
 namespace tarn::ctl {

@@ -7,7 +7,7 @@
 #include <string>
 
 #include "plist/Result.h"
-#include "recorder/store/EventReader.h"
+#include "recorder/store/reading/EventReader.h"
 
 namespace tarn::ctl {
 

@@ -10,7 +10,7 @@
 
 #include "plist/Dictionary.h"
 #include "plist/Result.h"
-#include "recorder/store/EventReader.h"
+#include "recorder/store/reading/EventReader.h"
 
 namespace tarn::ctl {
 

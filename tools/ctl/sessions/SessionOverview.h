@@ -6,7 +6,7 @@
 #include <vector>
 
 #include "plist/Result.h"
-#include "recorder/store/SessionReader.h"
+#include "recorder/store/reading/SessionReader.h"
 
 namespace tarn::ctl {
 

@@ -11,7 +11,7 @@
 #include <string>
 #include <vector>
 
-#include "recorder/store/SessionReader.h"
+#include "recorder/store/reading/SessionReader.h"
 #include "tools/ctl/sessions/SessionMessage.h"
 
 namespace tarn::ctl {

@@ -8,9 +8,9 @@
 #include <vector>
 
 #include "plist/Result.h"
-#include "tools/ctl/Output.h"
 #include "tools/ctl/sessions/SessionOverview.h"
 #include "tools/ctl/sessions/SessionTimeline.h"
+#include "tools/ctl/terminal/Output.h"
 #include "tools/ctl/terminal/Terminal.h"
 #include "tools/ctl/terminal/TimeOption.h"
 

@@ -6,7 +6,7 @@
 #include <string>
 #include <vector>
 
-#include "recorder/store/SessionReader.h"
+#include "recorder/store/reading/SessionReader.h"
 #include "tools/ctl/sessions/SessionTimeline.h"
 
 namespace tarn::ctl {

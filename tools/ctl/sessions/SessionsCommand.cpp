@@ -7,8 +7,8 @@
 #include <vector>
 
 #include "tools/ctl/Command.h"
-#include "tools/ctl/Output.h"
 #include "tools/ctl/sessions/SessionOverview.h"
+#include "tools/ctl/terminal/Output.h"
 #include "tools/ctl/terminal/TextTable.h"
 #include "tools/ctl/terminal/TimeOption.h"
 

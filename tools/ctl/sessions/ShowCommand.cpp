@@ -4,9 +4,9 @@
 #include <memory>
 
 #include "tools/ctl/Command.h"
-#include "tools/ctl/Output.h"
 #include "tools/ctl/sessions/SessionCommand.h"
 #include "tools/ctl/sessions/SessionStory.h"
+#include "tools/ctl/terminal/Output.h"
 
 namespace tarn::ctl {
 

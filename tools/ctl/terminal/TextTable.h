@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-#include "tools/ctl/Output.h"
+#include "tools/ctl/terminal/Output.h"
 #include "tools/ctl/terminal/Terminal.h"
 
 namespace tarn::ctl {

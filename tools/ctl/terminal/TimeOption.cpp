@@ -7,7 +7,7 @@
 #include <cmath>
 #include <ctime>
 
-#include "tools/ctl/Output.h"
+#include "tools/ctl/terminal/Output.h"
 
 namespace tarn::ctl {
 

@@ -11,7 +11,7 @@
 
 #include "host/system/Files.h"
 #include "tools/ctl/Command.h"
-#include "tools/ctl/Output.h"
+#include "tools/ctl/terminal/Output.h"
 #include "tools/ctl/views/LiveSource.h"
 #include "tools/ctl/views/TopLoop.h"
 

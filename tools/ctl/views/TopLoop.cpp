@@ -2,7 +2,7 @@
 
 #include <utility>
 
-#include "tools/ctl/Output.h"
+#include "tools/ctl/terminal/Output.h"
 
 namespace tarn::ctl {
 

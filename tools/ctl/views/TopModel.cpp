@@ -7,7 +7,7 @@
 
 #include "plist/EscapedText.h"
 #include "plist/formats/Json.h"
-#include "tools/ctl/Output.h"
+#include "tools/ctl/terminal/Output.h"
 #include "tools/report/Texts.h"
 
 namespace tarn::ctl {

@@ -8,12 +8,12 @@
 #include <limits>
 #include <memory>
 
-#include "recorder/store/EventReader.h"
-#include "recorder/store/StoreAccess.h"
+#include "recorder/store/reading/EventReader.h"
+#include "recorder/store/reading/StoreAccess.h"
 #include "tools/ctl/Command.h"
 #include "tools/ctl/EventText.h"
-#include "tools/ctl/Output.h"
 #include "tools/ctl/sessions/SessionEvents.h"
+#include "tools/ctl/terminal/Output.h"
 #include "tools/ctl/terminal/TimeOption.h"
 
 namespace tarn::ctl {

@@ -1,4 +1,4 @@
-#include "recorder/store/EventReader.h"
+#include "recorder/store/reading/EventReader.h"
 
 #include <sqlite3.h>
 #include <sys/stat.h>
@@ -8,9 +8,9 @@
 #include <thread>
 #include <utility>
 
-#include "recorder/store/GlobPattern.h"
-#include "recorder/store/Statement.h"
-#include "recorder/store/StoreAccess.h"
+#include "recorder/store/StoreLayout.h"
+#include "recorder/store/reading/EventPlaces.h"
+#include "recorder/store/reading/StoreAccess.h"
 
 namespace tarn::recorder {
 
@@ -22,6 +22,8 @@ constexpr int kBusyMilliseconds = 2000;
 constexpr std::chrono::microseconds kFirstLook{500};
 constexpr std::chrono::microseconds kLastLook{200'000};
 constexpr int kQuickLooks = 40;
+// Ids that are gone through before it is looked up where there is more of what is asked for.
+constexpr std::int64_t kIdsAtOnce = 4096;
 // What a read may cost, by the bytes of the file and its log. Rows of ours cost far less; a damaged or made-up file may
 // lead into itself and would otherwise never end, or say far more than it holds.
 constexpr int kStepsAtOnce = 1000;  // of SQLite's machine, between two looks at the bound
@@ -29,16 +31,6 @@ constexpr std::int64_t kStepsPerByte = 64;
 constexpr std::int64_t kStepsOfSmallFile = 1'000'000;
 constexpr std::int64_t kTextPerByte = 4;
 constexpr std::int64_t kTextOfSmallFile = 65536;
-
-std::string_view valueText(sqlite3_value* value) noexcept {
-  const void* const bytes = sqlite3_value_blob(value);
-  const auto size = static_cast<std::size_t>(sqlite3_value_bytes(value));
-  return bytes == nullptr ? std::string_view() : std::string_view(static_cast<const char*>(bytes), size);
-}
-
-void matchesGlob(sqlite3_context* context, int, sqlite3_value** values) {
-  sqlite3_result_int(context, globMatches(valueText(values[0]), valueText(values[1])) ? 1 : 0);
-}
 
 int spendSteps(void* stepsLeft) {
   auto& left = *static_cast<std::int64_t*>(stepsLeft);
@@ -87,8 +79,7 @@ Status EventReader::openAs(const std::string& name) {
   if (connection_.open(name, SQLITE_OPEN_READONLY | SQLITE_OPEN_URI) != SQLITE_OK) return lastError();
   sqlite3_busy_timeout(connection_.handle(), kBusyMilliseconds);
   distrust(connection_.handle(), stepsLeft_);
-  sqlite3_create_function_v2(connection_.handle(), "matches_glob", 2, SQLITE_UTF8 | SQLITE_DETERMINISTIC, nullptr,
-                             matchesGlob, nullptr, nullptr, nullptr);
+  addGlobFunction(connection_);
   // Only the first reading access shows whether the log and its index can be used.
   if (!connection_.integer("SELECT count(*) FROM sqlite_schema")) return lastError();
   return {};
@@ -169,16 +160,16 @@ Result<EventPage> EventReader::readOpen(const EventQuery& query) {
   std::int64_t after = query.after;
   // A file of the first layout has a table of them.
   const auto tables = connection_.integer(
-      "SELECT count(*) FROM sqlite_schema, pragma_user_version WHERE name = 'events' AND "
-      "((type = 'table' AND rootpage > 0) OR (type = 'view' AND user_version > 0))");
+      "SELECT count(*) FROM sqlite_schema, pragma_user_version WHERE (name IN ('events', 'event_rows') AND "
+      "type = 'table' AND rootpage > 0) OR (name = 'events' AND type = 'view' AND user_version > 0)");
   if (tables == 0) {
     static_cast<void>(connection_.run("ROLLBACK"));
     return missing();
   }
-  result.value.hasSessions =
-      connection_.integer("SELECT count(*) FROM pragma_table_info('events') WHERE name = 'session'") == 1;
   after = startingPoint(after);
-  const auto error = readRows(query, after, result.value);
+  const bool isNewer = connection_.integer("PRAGMA user_version").value_or(0) > kLayoutVersion;
+  const Status error =
+      isNewer ? Error{SQLITE_CANTOPEN, "its layout is that of a newer service"} : readRows(query, after, result.value);
   static_cast<void>(connection_.run("ROLLBACK"));
   if (error.failed()) return {{}, about(error->text)};
   lastRead_ = opened_;
@@ -186,21 +177,32 @@ Result<EventPage> EventReader::readOpen(const EventQuery& query) {
 }
 
 Status EventReader::readRows(const EventQuery& query, std::int64_t after, EventPage& page) {
-  const std::string session = page.hasSessions ? "session" : "NULL";
-  std::string sql = "SELECT id, time, backend, name, payload, detail, " + session + " FROM events WHERE id > ?1";
-  sql.append(query.backend ? " AND backend = ?2" : "").append(query.nameGlob ? " AND matches_glob(?3, name)" : "");
-  sql.append(query.session ? " AND " + session + " = ?5" : "").append(query.since ? " AND time >= ?6" : "");
-  sql.append(query.until ? " AND time < ?7" : "").append(" ORDER BY id LIMIT ?4");
+  const EventSelect events = selectEvents(connection_);
+  page.hasSessions = events.hasSessions;
   Statement rows;
-  if (rows.prepare(connection_.handle(), sql) != SQLITE_OK) return lastError();
-  rows.bind(1, after).bind(4, static_cast<std::int64_t>(query.limit));
-  rows.bind(5, query.session.value_or(0)).bind(6, query.since.value_or(0)).bind(7, query.until.value_or(0));
-  if (query.backend) {
-    rows.bind(2, std::string_view(*query.backend));
+  if (prepareRows(connection_, events, query, rows) != SQLITE_OK) return lastError();
+  const auto greatest =
+      connection_.integer(events.isOlder ? "SELECT max(id) FROM events" : "SELECT max(id) FROM event_rows");
+  const std::int64_t last = std::max(after, greatest.value_or(after));
+  // The next ids are read as they come. Where they hold little of what is asked for, it is looked up where there is
+  // any.
+  const std::int64_t near = events.isOlder || last - after < kIdsAtOnce ? last : after + kIdsAtOnce;
+  Status error = readFrom(rows, {after + 1, near}, query.limit, page);
+  if (error.ok() && near < last && page.rows.size() < query.limit) {
+    Result<std::vector<IdRange>> places = findPlaces(connection_, query, {near + 1, last});
+    if (places.failed()) return lastError();
+    for (std::size_t i = 0; error.ok() && i < places.value.size() && page.rows.size() < query.limit; ++i) {
+      error = readFrom(rows, places.value[i], query.limit, page);
+    }
   }
-  if (query.nameGlob) {
-    rows.bind(3, std::string_view(*query.nameGlob));
-  }
+  if (error.failed()) return error;
+  page.more = page.rows.size() == query.limit;
+  page.lookedUpTo = page.more && !page.rows.empty() ? page.rows.back().id : last;
+  return {};
+}
+
+Status EventReader::readFrom(Statement& rows, const IdRange& ids, std::size_t limit, EventPage& page) {
+  rows.bind(1, ids.first).bind(2, ids.last).bind(3, static_cast<std::int64_t>(limit - page.rows.size()));
   int code = rows.step();
   for (; code == SQLITE_ROW; code = rows.step()) {
     for (int column = 2; column < 6; ++column) {
@@ -212,9 +214,7 @@ Status EventReader::readRows(const EventQuery& query, std::int64_t after, EventP
                          rows.isNull(6) ? std::nullopt : std::optional(rows.integer(6))});
   }
   if (code != SQLITE_DONE) return lastError();
-  page.more = page.rows.size() == query.limit;
-  const std::int64_t last = connection_.integer("SELECT max(id) FROM events").value_or(after);
-  page.lookedUpTo = page.more && !page.rows.empty() ? page.rows.back().id : std::max(after, last);
+  rows.reset();
   return {};
 }
 

@@ -1,4 +1,4 @@
-#include "recorder/store/StoreAccess.h"
+#include "recorder/store/reading/StoreAccess.h"
 
 #include <fcntl.h>
 #include <sqlite3.h>
@@ -112,9 +112,9 @@ Status requireSessions(Connection& connection, const std::filesystem::path& file
   const Result<std::int64_t> version = connection.readInteger("PRAGMA user_version");
   if (version.failed()) return version.error;
   if (version.value < kFirstVersionWithSessions) return noSessionsIn(file);
-  if (version.value > kNewestVersion) {
+  if (version.value > kLayoutVersion) {
     return Error{0, file.string() + " is of version " + std::to_string(version.value) +
-                        ", which is newer than this program: it reads up to " + std::to_string(kNewestVersion)};
+                        ", which is newer than this program: it reads up to " + std::to_string(kLayoutVersion)};
   }
   return {};
 }

@@ -20,9 +20,9 @@
 
 #include "plist/Result.h"
 #include "recorder/store/Connection.h"
-#include "recorder/store/EventReader.h"
 #include "recorder/store/Statement.h"
-#include "recorder/store/StoreAccess.h"
+#include "recorder/store/reading/EventReader.h"
+#include "recorder/store/reading/StoreAccess.h"
 
 namespace tarn::recorder {
 

@@ -1,4 +1,4 @@
-#include "recorder/store/ChangeWatch.h"
+#include "recorder/store/files/ChangeWatch.h"
 
 #include <poll.h>
 #include <sys/inotify.h>

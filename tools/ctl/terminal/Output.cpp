@@ -1,4 +1,4 @@
-#include "tools/ctl/Output.h"
+#include "tools/ctl/terminal/Output.h"
 
 #include <cerrno>
 #include <cstdio>

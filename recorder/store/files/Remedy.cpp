@@ -1,4 +1,4 @@
-#include "recorder/store/Remedy.h"
+#include "recorder/store/files/Remedy.h"
 
 #include <sqlite3.h>
 

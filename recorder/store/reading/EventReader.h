@@ -18,8 +18,10 @@
 #include <vector>
 
 #include "plist/Result.h"
-#include "recorder/store/ChangeWatch.h"
 #include "recorder/store/Connection.h"
+#include "recorder/store/Statement.h"
+#include "recorder/store/StoreCheck.h"
+#include "recorder/store/files/ChangeWatch.h"
 
 namespace tarn::recorder {
 
@@ -107,6 +109,7 @@ class EventReader {
   Result<EventPage> readOpen(const EventQuery& query);
   // The rows, within the bounds of this read.
   [[nodiscard]] Status readRows(const EventQuery& query, std::int64_t after, EventPage& page);
+  [[nodiscard]] Status readFrom(Statement& rows, const IdRange& ids, std::size_t limit, EventPage& page);
 
   const std::filesystem::path file_;
   // Open from one read to the next, as long as the file stays the same.

@@ -1,4 +1,4 @@
-#include "recorder/store/SessionReader.h"
+#include "recorder/store/reading/SessionReader.h"
 
 #include <sqlite3.h>
 

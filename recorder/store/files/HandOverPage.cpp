@@ -1,4 +1,4 @@
-#include "recorder/store/HandOverPage.h"
+#include "recorder/store/files/HandOverPage.h"
 
 #include <fcntl.h>
 #include <sys/mman.h>
@@ -9,8 +9,8 @@
 #include <cerrno>
 #include <system_error>
 
-#include "recorder/store/RowHash.h"
 #include "recorder/store/files/MappedGuard.h"
+#include "recorder/store/files/RowHash.h"
 
 namespace tarn::recorder {
 
