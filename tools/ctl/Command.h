@@ -49,6 +49,8 @@ void addLintCommand(CLI::App& app, Context& context);
 void addExplainCommand(CLI::App& app, Context& context);
 // Compares the recorded events with their checksums; changes nothing.
 void addCheckCommand(CLI::App& app, Context& context);
+// Makes one page of sessions with pictures (tools/report).
+void addReportCommand(CLI::App& app, Context& context);
 // Shows the open sessions, what waits and the ledger, again and again (views/TopLoop).
 void addTopCommand(CLI::App& app, Context& context);
 

@@ -75,6 +75,7 @@ void describe(CLI::App& app, Context& context, Options& options) {
   addSessionsCommand(app, context);
   addShowCommand(app, context);
   addExportCommand(app, context);
+  addReportCommand(app, context);
   addTopCommand(app, context);
 }
 
