@@ -6,8 +6,8 @@ namespace tarn::linux_host {
 
 namespace {
 
-// Well above what messages take, so that none of them costs a mapping.
-constexpr int kLargeBytes = 256 * 1024;
+// Well above what messages take, so that none of them costs a mapping; what the allocator begins with itself.
+constexpr int kLargeBytes = 128 * 1024;
 // What may lie free at the heap's end before it goes back: as much as a busy second may take and give.
 constexpr int kFreeBytes = 4 * 1024 * 1024;
 
