@@ -51,6 +51,7 @@ recorder::RecorderOptions recorderOptions(const HostConfiguration& configuration
   options.folders = {logs + "Reporting", logs + "Traces"};
   options.others = overflow.size();
   options.sessionOf = &WorkOwner::current;
+  options.version = TARN_VERSION;
   return options;
 }
 

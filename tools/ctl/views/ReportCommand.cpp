@@ -13,7 +13,7 @@
 #include "host/system/SystemError.h"
 #include "host/system/UniqueDescriptor.h"
 #include "tools/ctl/Command.h"
-#include "tools/ctl/Output.h"
+#include "tools/ctl/terminal/Output.h"
 #include "tools/ctl/terminal/TimeOption.h"
 #include "tools/report/Page.h"
 #include "tools/report/ReportMaker.h"
