@@ -103,7 +103,7 @@ Result<StoreFiles::LogState> StoreFiles::lookAtLog(std::int64_t bytes) {
   return {status.st_size >= bytes ? LogState::Whole : LogState::Cut};
 }
 
-std::int64_t StoreFiles::indexBytes() const {
+std::int64_t StoreFiles::indexBytes() const noexcept {
   struct stat status {};
   return ::stat(index_.c_str(), &status) == 0 ? std::int64_t{status.st_size} : 0;
 }

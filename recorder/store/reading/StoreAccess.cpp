@@ -12,6 +12,7 @@
 #include <system_error>
 
 #include "recorder/store/GlobPattern.h"
+#include "recorder/store/StoreLayout.h"
 
 namespace tarn::recorder {
 

@@ -129,7 +129,7 @@ bool RecordingService::listenerShouldAcceptNewConnection(const std::shared_ptr<p
   allocate(Short::Accepting);
   const int number = ++clients_;
   processIdentifiers.push_back(connection->processIdentifier());
-  openers.emplace_back(connection->number(), connection->userIdentifier());
+  openers.emplace_back(connection->number(), connection->user());
   descriptions.push_back(connection->description());
   connection->setExportedObject(std::make_shared<Client>(*this, number));
   connection->setInterruptionHandler([this, number] {
