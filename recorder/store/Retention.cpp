@@ -136,6 +136,9 @@ int Retention::removeSlice(double now, std::int64_t newest, bool& removedAny, st
   std::int64_t before = std::min(oldest + kSliceIds, newest + 1);
   if (usedBytes <= limits_.maxBytes - limits_.maxBytes / kReserveShare) {
     code = readAgedBefore(now - limits_.maxAgeSeconds, before, before);
+  } else {
+    // Of a few large ones at most half, so that no more go than must.
+    before = std::min(before, oldest + std::max<std::int64_t>((newest - oldest + 1) / 2, 1));
   }
   if (code != SQLITE_OK || before <= oldest) return code;
   removedAny = true;

@@ -374,6 +374,7 @@ TEST_F(LinuxPlatformTest, WithoutTheRecorderNothingStandsInAndNothingIsWritten) 
 TEST_F(LinuxPlatformTest, AnEventIsThatOfTheSessionForWhichItWasHandedOver) {
   make();
   ASSERT_EQ(platform_->start().text(), "");
+  ASSERT_EQ(listen(), "");
   platform::SessionRecords& records = *platform_->facilities().sessionRecords;
   const auto queue = platform_->facilities().workQueues.makeSerialQueue("own", platform::QualityOfService::Utility);
   for (const std::string name : {"a", "b"}) {

@@ -110,6 +110,7 @@ TEST_F(RecorderWindow, IsFullOnceTheOldestEventHasWaitedTooLong) {
   recorder_->setRoomHandler([&] { ++calls; });
   recorder_->start();
   recorder_->waitUntilOpened();
+  ASSERT_TRUE(flush());  // the row of the run, with which the event would go
   EXPECT_FALSE(recorder_->isFull());
   record("waits");
   EXPECT_TRUE(eventually([&] { return recorder_->isFull(); }));
