@@ -86,7 +86,9 @@ TEST_F(StoreMigration, ItHappensOnce) {
 TEST_F(StoreMigration, ADamagedEventStaysDamaged) {
   makeVersion0();
   change(file(), "UPDATE events SET name = 'other' WHERE id = 50");
-  open();
+  start();
+  ASSERT_TRUE(eventually([&] { return log_.contains(" are lost ("); })) << "the next look at the rows finds it";
+  stop();
   const auto report = inspectStore(file());
   ASSERT_TRUE(report.ok());
   EXPECT_EQ(report.value.notedLost, (std::vector<IdRange>{{50, 50}})) << "it is found, and the others are carried over";
