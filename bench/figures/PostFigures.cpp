@@ -83,12 +83,18 @@ enum State : std::size_t { kAlive, kStopped, kAbsent, kKilled, kFull, kStates };
 constexpr std::array<const char*, kStates> kStateNames{"alive", "stopped", "absent", "killed over and over",
                                                        "without room on its disk"};
 
-// Of one round.
+// Whether the thread rests between two bursts: while the service takes what was posted, or because nobody does. The
+// first post after a rest finds the caches cold, so what stands beside it rests likewise.
+constexpr bool rests(std::size_t state) {
+  return state != kStopped;
+}
+
+// Of one round. Where there are two, the second is with rests.
 struct Round {
   std::array<Spread, kStates> posts{};
-  Spread bare{};
+  std::array<Spread, 2> bare{};
   Spread clock{};
-  std::optional<Spread> tracepoint;
+  std::array<std::optional<Spread>, 2> tracepoint;
   double rate = 0;
   double processor = 0;
 };
@@ -104,25 +110,30 @@ Spread spreadWhileTaken(Poster& poster, std::size_t posts) {
       });
 }
 
-// Of posts to one that may never take them; over some time.
-Spread spreadWithPauses(const std::string& socketPath, std::size_t posts) {
+// Of calls with a rest before each burst.
+template <class Call>
+Spread spreadWithPauses(std::size_t count, Call call) {
+  return spread(count, call, [](std::size_t i) {
+    if (i % kBurst == 0) {
+      ::usleep(kPauseMicroseconds);
+    }
+  });
+}
+
+// Of posts to a service that may never take them; over some time.
+Spread spreadOfPosts(const std::string& socketPath, std::size_t posts) {
   Poster poster(socketPath, 0);
   becomeRealTime();
-  return spread(
-      posts, [&](std::size_t i) { keep(poster.post(i)); },
-      [](std::size_t i) {
-        if (i % kBurst == 0) {
-          ::usleep(kPauseMicroseconds);
-        }
-      });
+  return spreadWithPauses(posts, [&](std::size_t i) { keep(poster.post(i)); });
 }
 
 // Of as many tracepoints; nothing where there is no tracer.
-std::optional<Spread> spreadOfTracer([[maybe_unused]] const Settings& settings) {
+std::optional<Spread> spreadOfTracer([[maybe_unused]] const Settings& settings, [[maybe_unused]] useconds_t pause) {
 #ifdef TARN_TRACER_RUNNER
   const TemporaryDirectory folder(settings.directory);
   const std::string command = std::string("\"" TARN_TRACER_RUNNER "\" \"") + folder.path() +
-                              "\" \"" TARN_TRACER_PROGRAM "\" " + std::to_string(settings.count(kPosts));
+                              "\" \"" TARN_TRACER_PROGRAM "\" " + std::to_string(settings.count(kPosts)) + " " +
+                              std::to_string(kBurst) + " " + std::to_string(pause);
   std::FILE* const output = ::popen(command.c_str(), "r");
   if (output == nullptr) return std::nullopt;
   Spread figures{};
@@ -176,6 +187,7 @@ void measureWithService(const Settings& settings, const ServiceProcess& service,
     append(figures, spreadWhileTaken(poster, posts));
     BareRing bare;
     append(figures, spread(posts, [&](std::size_t) { bare.post(); }));
+    append(figures, spreadWithPauses(posts, [&](std::size_t) { bare.post(); }));
     append(figures, spread(posts, [](std::size_t i) { keep(i); }));
     ::kill(service.id(), SIGSTOP);
     append(figures, spread(posts, [&](std::size_t i) { keep(poster.post(i)); }));
@@ -186,7 +198,8 @@ void measureWithService(const Settings& settings, const ServiceProcess& service,
   round.rate = *next++;
   round.processor = *next++;
   round.posts[kAlive] = take(next);
-  round.bare = take(next);
+  round.bare[0] = take(next);
+  round.bare[1] = take(next);
   round.clock = take(next);
   round.posts[kStopped] = take(next);
 }
@@ -196,7 +209,7 @@ Spread measureWithPauses(const Settings& settings, const std::string& socketPath
   const std::vector<double> results = measureInChild(
       [&] {
         std::vector<double> figures;
-        append(figures, spreadWithPauses(socketPath, settings.count(kPosts)));
+        append(figures, spreadOfPosts(socketPath, settings.count(kPosts)));
         return figures;
       },
       meanwhile);
@@ -228,7 +241,7 @@ Round measureRound(const Settings& settings, const ServiceProcess& service) {
     const ServiceProcess full(settings, {.recordsEvents = true, .mostFileBytes = kMostFileBytes});
     round.posts[kFull] = measureWithPauses(settings, full.socketPath());
   }
-  round.tracepoint = spreadOfTracer(settings);
+  round.tracepoint = {spreadOfTracer(settings, 0), spreadOfTracer(settings, kPauseMicroseconds)};
   return round;
 }
 
@@ -245,8 +258,9 @@ double medianOf(const std::vector<Round>& rounds, Get get) {
 // What a post takes, the clock's own part taken off, beside a tracepoint likewise.
 void addTracer(const std::vector<Round>& rounds, std::size_t part, const char* name, Table& table) {
   const double clock = medianOf(rounds, [](const Round& round) { return round.clock[0]; });
-  const double tracer = medianOf(rounds, [&](const Round& round) { return (*round.tracepoint)[part]; }) - clock;
   for (std::size_t state = 0; state < kStates; ++state) {
+    const double tracer =
+        medianOf(rounds, [&](const Round& round) { return (*round.tracepoint[rests(state)])[part]; }) - clock;
     const double ours = medianOf(rounds, [&](const Round& round) { return round.posts[state][part]; }) - clock;
     table.addWithTarget({std::string("the same without the clock, service ") + kStateNames[state] + ", " + name,
                          nanoseconds(ours),
@@ -259,8 +273,8 @@ void addTracer(const std::vector<Round>& rounds, std::size_t part, const char* n
 }
 
 void addPart(const std::vector<Round>& rounds, std::size_t part, const char* name, Table& table) {
-  const double bare = medianOf(rounds, [&](const Round& round) { return round.bare[part]; });
   for (std::size_t state = 0; state < kStates; ++state) {
+    const double bare = medianOf(rounds, [&](const Round& round) { return round.bare[rests(state)][part]; });
     const double ours = medianOf(rounds, [&](const Round& round) { return round.posts[state][part]; });
     table.add({std::string("post of a message, service ") + kStateNames[state] + ", " + name,
                nanoseconds(ours),
@@ -281,8 +295,9 @@ void measurePost(const Settings& settings, Table& table) {
   for (int round = 0; round < settings.rounds; ++round) {
     rounds.push_back(measureRound(settings, service));
   }
-  const bool traced =
-      std::all_of(rounds.begin(), rounds.end(), [](const Round& round) { return round.tracepoint.has_value(); });
+  const bool traced = std::all_of(rounds.begin(), rounds.end(), [](const Round& round) {
+    return round.tracepoint[0].has_value() && round.tracepoint[1].has_value();
+  });
   if (!traced) {
     std::cerr << ", no tracepoint beside it: that needs liblttng-ust-dev and lttng-tools" << std::flush;
   }

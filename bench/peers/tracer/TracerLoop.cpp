@@ -1,11 +1,13 @@
 // What a tracepoint of the same fields costs, for the figure of a post: prints the nanoseconds of half, of 999 of 1000
 // and of all of so many tracepoints at the most, the clock's own part included, and whether somebody recorded them.
-// run_traced.sh sees to that.
+// run_traced.sh sees to that. With a pause of other than 0 microseconds the thread sleeps so long before each burst:
+// the first call after a sleep finds the caches cold.
 //
-// usage: tarnbenchtracer COUNT
+// usage: tarnbenchtracer COUNT BURST PAUSE
 #define LTTNG_UST_TRACEPOINT_CREATE_PROBES
 #define LTTNG_UST_TRACEPOINT_DEFINE
 #include <sched.h>
+#include <unistd.h>
 
 #include <algorithm>
 #include <charconv>
@@ -16,10 +18,20 @@
 
 #include <TracerMessage.tp>
 
+namespace {
+
+bool readNumber(const char* word, std::size_t& number) {
+  return std::from_chars(word, word + std::strlen(word), number).ec == std::errc();
+}
+
+}  // namespace
+
 int main(int count, char** words) {
   std::size_t posts = 0;
-  if (count != 2 || std::from_chars(words[1], words[1] + std::strlen(words[1]), posts).ec != std::errc() ||
-      posts == 0) {
+  std::size_t burst = 0;
+  std::size_t pause = 0;
+  if (count != 4 || !readNumber(words[1], posts) || !readNumber(words[2], burst) || !readNumber(words[3], pause) ||
+      posts == 0 || burst == 0) {
     return 64;
   }
   TracedMessage message{
@@ -28,6 +40,9 @@ int main(int count, char** words) {
   ::sched_setscheduler(0, SCHED_FIFO | SCHED_RESET_ON_FORK, &parameter);
   std::vector<double> samples(posts);
   for (double& sample : samples) {
+    if (pause != 0 && static_cast<std::size_t>(&sample - samples.data()) % burst == 0) {
+      ::usleep(static_cast<useconds_t>(pause));
+    }
     const auto start = std::chrono::steady_clock::now();
     lttng_ust_tracepoint(tarnbench, message, &message);
     sample = std::chrono::duration<double, std::nano>(std::chrono::steady_clock::now() - start).count();
