@@ -15,6 +15,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <cstring>
 
 #include "clients/ring/RingLayout.h"
 #include "clients/ring/SharedWords.h"
@@ -36,19 +37,46 @@ class RecordContent {
     Words::copyIn(at_, &word, sizeof word);
     at_ += sizeof word;
   }
-  // The bytes, and zeros up to the next multiple of 8.
+  // The bytes, and zeros up to the next multiple of 8. Most texts are short: those are copied word by word here.
   void put(const void* bytes, std::uint32_t count) noexcept {
-    if (count % 8 != 0) {
-      const std::uint64_t zeros = 0;
-      Words::copyIn(at_ + tarnring_padded(count) - sizeof zeros, &zeros, sizeof zeros);
+    const auto* from = static_cast<const std::byte*>(bytes);
+    std::byte* const end = at_ + tarnring_padded(count);
+    if (count < 8) {
+      putShort(from, count);
+    } else if (count > kMostWordwise) {
+      putZeros(end - 8);
+      Words::copyIn(at_, from, count);
+    } else {
+      putZeros(end - 8);
+      for (std::uint32_t done = 0; done + 8 <= count; done += 8) {
+        Words::copyIn(at_ + done, from + done, 8);
+      }
+      // What is left, with some that stand there already.
+      Words::copyIn(at_ + count - 8, from + count - 8, 8);
     }
-    if (count != 0) {
-      Words::copyIn(at_, bytes, count);
-    }
-    at_ += tarnring_padded(count);
+    at_ = end;
   }
 
  private:
+  static constexpr std::uint32_t kMostWordwise = 128;
+
+  static void putZeros(std::byte* at) noexcept {
+    const std::uint64_t zeros = 0;
+    Words::copyIn(at, &zeros, sizeof zeros);
+  }
+  void putShort(const std::byte* from, std::uint32_t count) noexcept {
+    if (count == 0) return;
+    std::uint64_t word = 0;
+    auto* to = reinterpret_cast<std::byte*>(&word);
+    for (std::uint32_t part = 4; part != 0; part /= 2) {
+      if ((count & part) == 0) continue;
+      std::memcpy(to, from, part);
+      to += part;
+      from += part;
+    }
+    Words::copyIn(at_, &word, sizeof word);
+  }
+
   std::byte* at_;
 };
 

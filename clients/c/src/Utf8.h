@@ -29,24 +29,38 @@ inline std::size_t characterLength(const unsigned char* at, std::size_t left) no
   return length;
 }
 
+// Whether the eight or the four bytes from here on are ASCII.
+inline bool isAscii8(const unsigned char* at) noexcept {
+  std::uint64_t word = 0;
+  std::memcpy(&word, at, sizeof word);
+  return (word & 0x8080808080808080U) == 0;
+}
+inline bool isAscii4(const unsigned char* at) noexcept {
+  std::uint32_t word = 0;
+  std::memcpy(&word, at, sizeof word);
+  return (word & 0x80808080U) == 0;
+}
+
 // Whether all of it is well-formed; of an empty text it is. Used in post(), so it neither allocates nor calls anything.
 inline bool isUtf8(const char* text, std::size_t length) noexcept {
   const auto* at = reinterpret_cast<const unsigned char*>(text);
-  std::size_t left = length;
-  while (left != 0) {
-    std::uint64_t word = 0;
-    if (left >= sizeof word) {
-      std::memcpy(&word, at, sizeof word);
-      if ((word & 0x8080808080808080U) == 0) {
-        at += sizeof word;
-        left -= sizeof word;
+  const unsigned char* const end = at + length;
+  while (at != end) {
+    const auto left = static_cast<std::size_t>(end - at);
+    if (left >= 8) {
+      if (isAscii8(at)) {
+        at += 8;
         continue;
       }
+    } else if (length >= 8) {
+      // The few last ones together with some that were looked at before.
+      if (isAscii8(end - 8)) return true;
+    } else if (left >= 4 && isAscii4(at) && isAscii4(end - 4)) {
+      return true;
     }
     const std::size_t taken = characterLength(at, left);
     if (taken == 0) return false;
     at += taken;
-    left -= taken;
   }
   return true;
 }
