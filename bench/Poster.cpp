@@ -1,5 +1,7 @@
 #include "bench/Poster.h"
 
+#include <unistd.h>
+
 #include <cstring>
 
 #include "bench/Processes.h"
@@ -67,6 +69,18 @@ void Poster::openWriter(std::uint32_t ringBytes) {
 
 void Poster::waitUntilTaken() {
   check(tarnreporting_client_flush(client_, kTimeoutMs));
+}
+
+void Poster::waitUntilCommitted() {
+  waitUntilTaken();
+  tarnreporting_state state = {};
+  state.size = sizeof state;
+  for (std::uint32_t waitedMs = 0; waitedMs < kTimeoutMs; ++waitedMs) {
+    check(tarnreporting_client_state(client_, &state));
+    if (state.committed == state.posted) return;
+    ::usleep(1000);
+  }
+  fail("what was posted isn't committed");
 }
 
 }  // namespace tarn::bench

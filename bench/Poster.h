@@ -30,6 +30,8 @@ class Poster {
     return tarnreporting_post(writer_, shape_, values_.data(), values_.size());
   }
   void waitUntilTaken();
+  // Also until what came of it is safe on the disk.
+  void waitUntilCommitted();
 
  private:
   const std::uint32_t closeMs_;

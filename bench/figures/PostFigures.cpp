@@ -27,12 +27,14 @@ namespace {
 constexpr std::size_t kPosts = 200'000;           // a round, of those that are timed
 constexpr std::size_t kAllPosts = 10'000'000;     // of which the worst is told, once
 constexpr std::size_t kStreamed = 500'000;        // of those that are counted
+constexpr std::size_t kRecorded = 200'000;        // of those that are recorded too
 constexpr std::size_t kBurst = 500;               // posts between two looks at whether the service has them
 constexpr useconds_t kPauseMicroseconds = 4000;   // after each burst, where the service has something else to do
 constexpr useconds_t kLifeMicroseconds = 50'000;  // of a service that is killed over and over
 constexpr long kMostFileBytes = 262'144;          // of one without room on its disk
 constexpr double kProcessorTarget = 0.7e-6;
 constexpr double kRateTarget = 1.2e6;
+constexpr double kRecordedRateTarget = 200e3;
 constexpr double kWorstTarget = 20e3;   // in nanoseconds
 constexpr double kTracerTarget = 0.25;  // of the tracepoint's time
 
@@ -97,6 +99,7 @@ struct Round {
   std::array<std::optional<Spread>, 2> tracepoint;
   double rate = 0;
   double processor = 0;
+  std::vector<double> recorded;
 };
 
 // Times of posts to a service that takes them meanwhile.
@@ -157,8 +160,9 @@ Spread take(std::vector<double>::const_iterator& from) {
   return figures;
 }
 
-// Messages a second, and the service's processor time for one.
-std::array<double, 2> stream(Poster& poster, pid_t service, std::size_t count) {
+// Messages a second until `wait(poster)` is done, and the service's processor time for one.
+template <class Wait>
+std::array<double, 2> stream(Poster& poster, pid_t service, std::size_t count, Wait wait) {
   const double processorBefore = processorSeconds(service);
   const double start = nowSeconds();
   for (std::size_t i = 0; i < count; ++i) {
@@ -166,7 +170,7 @@ std::array<double, 2> stream(Poster& poster, pid_t service, std::size_t count) {
       ::sched_yield();
     }
   }
-  poster.waitUntilTaken();
+  wait(poster);
   const auto messages = static_cast<double>(count);
   return {messages / (nowSeconds() - start), (processorSeconds(service) - processorBefore) / messages};
 }
@@ -180,7 +184,8 @@ void measureWithService(const Settings& settings, const ServiceProcess& service,
       poster.post(i);
     }
     poster.waitUntilTaken();
-    for (const double figure : stream(poster, service.id(), settings.count(kStreamed))) {
+    for (const double figure :
+         stream(poster, service.id(), settings.count(kStreamed), [](Poster& posted) { posted.waitUntilTaken(); })) {
       figures.push_back(figure);
     }
     becomeRealTime();
@@ -217,6 +222,17 @@ Spread measureWithPauses(const Settings& settings, const std::string& socketPath
   return take(next);
 }
 
+// The same with both events of each message recorded, until all are committed.
+std::vector<double> measureRecorded(const Settings& settings) {
+  const ServiceProcess service(settings, {.recordsEvents = true});
+  return measureInChild([&] {
+    Poster poster(service.socketPath());
+    const auto figures =
+        stream(poster, service.id(), settings.count(kRecorded), [](Poster& posted) { posted.waitUntilCommitted(); });
+    return std::vector<double>(figures.begin(), figures.end());
+  });
+}
+
 // Once: it takes long.
 double worstOfAll(const Settings& settings, const ServiceProcess& service) {
   return measureInChild([&] {
@@ -241,6 +257,7 @@ Round measureRound(const Settings& settings, const ServiceProcess& service) {
     const ServiceProcess full(settings, {.recordsEvents = true, .mostFileBytes = kMostFileBytes});
     round.posts[kFull] = measureWithPauses(settings, full.socketPath());
   }
+  round.recorded = measureRecorded(settings);
   round.tracepoint = {spreadOfTracer(settings, 0), spreadOfTracer(settings, kPauseMicroseconds)};
   return round;
 }
@@ -323,6 +340,12 @@ void measurePost(const Settings& settings, Table& table) {
   table.addWithTarget(
       {"processor time a message through a ring, nothing wanted", microseconds(processor), "", "", "<= 0.7 us", {}},
       processor, kProcessorTarget);
+  const double recorded = medianOf(rounds, [](const Round& round) { return round.recorded[0]; });
+  table.addWithTarget(
+      {"messages through a ring, both events recorded, until committed", perSecond(recorded), "", "", ">= 200 k/s", {}},
+      recorded, kRecordedRateTarget, true);
+  const double spent = medianOf(rounds, [](const Round& round) { return round.recorded[1]; });
+  table.add({"processor time a message through a ring, both events recorded", microseconds(spent), "", "", "", {}});
 }
 
 }  // namespace tarn::bench
