@@ -1,15 +1,14 @@
 // RingConsumer: the reading side of a ring. Copies each record out of the shared memory before anybody looks at it, so
 // that what is checked is what is used, and believes nothing that the writer wrote.
 //
-//   next() -> Record: its content is in the caller's buffer; accept() goes on, without it next() gives the same again
+//   next() -> Record: its content is in the caller's buffer; take() goes on, without it next() gives the same again
 //          -> Empty
 //          -> Broken: the positions or lengths make no sense; nothing more is to be read from this ring
 //
-//   position   given back         taken                                       head
-//              | accepted, kept . | next record ... published, not looked at  | nothing yet
+//   position   taken                                       head
+//   given back | next record ... published, not looked at  | nothing yet
 //
-// What was accepted is given back to the writer by publish(). One owner a ring, which also owns the memory. Threads:
-// one at a time.
+// One owner a ring, which also owns the memory. Threads: one at a time.
 #pragma once
 
 #include <cstddef>
@@ -70,21 +69,15 @@ class RingConsumer {
       Words::copyOut(buffer, byteAt(taken_) + TARNRING_RECORD_HEAD_BYTES, record.length);
       return Look::Record;
     }
-    accept(record);
+    stepOver(record);
     return next(buffer, record);  // once: a filler ends where the area ends, and one there is nothing but its head
   }
 
-  // Steps over the record that next() gave last; `record` must be that one. The writer gets its room back by publish().
-  void accept(const Record& record) noexcept {
-    taken_ += size_;
-    if (record.kind == TARNRING_MESSAGE || record.kind == TARNRING_FRAME) {
-      ++takenMessages_;
-    }
-  }
-
-  // Lets the writer use the room of what was accepted. The caller does so once a turn, since each store takes the cache
-  // line from the writer.
-  void publish() noexcept {
+  // Steps over the record that next() gave last; `record` must be that one. The writer may use its room from then on,
+  // and a later reader of the ring begins after it. Told record by record: the writer looks here only when it has no
+  // room left, so the line stays ours.
+  void take(const Record& record) noexcept {
+    stepOver(record);
     Words::store(&header_->taken_messages, takenMessages_);
     Words::storeRelease(&header_->taken, taken_);
   }
@@ -93,7 +86,7 @@ class RingConsumer {
     Words::store(&header_->committed_messages, messages);
     Words::storeRelease(&header_->committed, position);
   }
-  // Counts a record that was refused; it is accepted like any other.
+  // Counts a record that was refused; it is taken like any other.
   void refuse(tarnring_refusal reason) noexcept {
     Words::store(&header_->last_refusal, reason);
     Words::store(&header_->refused, ++refused_);
@@ -113,7 +106,7 @@ class RingConsumer {
   // Tells the writer that nobody need be woken; to be called after each sleep.
   void awake() noexcept { Words::store(&header_->asleep, 0); }
 
-  // Position and number of messages up to which records were accepted, published or not.
+  // Position and number of messages up to which records were taken.
   std::uint64_t taken() const noexcept { return taken_; }
   std::uint64_t takenMessages() const noexcept { return takenMessages_; }
   // As the writer tells them, which may be wrong: up to where it published, and how many records found no room.
@@ -125,6 +118,13 @@ class RingConsumer {
  private:
   // Where a position lies in the area, whose size is a power of two.
   std::byte* byteAt(std::uint64_t position) const noexcept { return data_ + (position & (dataBytes_ - 1)); }
+
+  void stepOver(const Record& record) noexcept {
+    taken_ += size_;
+    if (record.kind == TARNRING_MESSAGE || record.kind == TARNRING_FRAME) {
+      ++takenMessages_;
+    }
+  }
 
   // Reads how far the writer has come, when all that was known of is read. A head behind `taken_`, further ahead than
   // the area is long, or off the grid of 8 makes the ring Broken.

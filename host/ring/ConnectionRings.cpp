@@ -125,7 +125,6 @@ bool ConnectionRings::serveTurn(std::chrono::nanoseconds now) {
     dropped_ += dropped;
     board_.counts.droppedByClients += dropped;
     if (reader->consumer().taken() != before) {
-      reader->consumer().publish();
       served_.push_back(reader);
     }
     if (held || reader->consumer().taken() != before) {
@@ -179,80 +178,93 @@ ConnectionRings::Step ConnectionRings::serveRecord(RingReader& reader, RingOwner
                 "closed a ring of " + owner.description() + ": " + textOf(RingFault::Broken));
   }
   if (look != ring::Look::Record) return Step::Nothing;
-  Step step = Step::Served;
-  if (record.kind == TARNRING_GAP) {
-    ++board_.counts.gaps;
-  } else if (!owner.takesRingRequests()) {
-    step = Step::Held;
-  } else {
-    const std::span<const std::byte> content(buffer_.data(), record.length);
-    try {
-      step =
-          record.kind == TARNRING_MESSAGE ? serveMessage(reader, owner, content) : serveFrame(reader, owner, content);
-    } catch (const std::bad_alloc&) {
-      step = Step::Held;  // it waits in the ring until there is memory for it
-    }
-  }
+  const Step step = serveContent(reader, owner, record);
   if (step == Step::Served) {
-    reader.consumer().accept(record);
     share -= std::min<std::size_t>(share, TARNRING_RECORD_HEAD_BYTES + tarnring_padded(record.length));
   }
   return step;
 }
 
-ConnectionRings::Step ConnectionRings::serveMessage(RingReader& reader, RingOwner& owner,
-                                                    std::span<const std::byte> content) {
-  switch (decodeMessage(content)) {
+ConnectionRings::Step ConnectionRings::serveContent(RingReader& reader, RingOwner& owner, const ring::Record& record) {
+  if (record.kind == TARNRING_GAP) {
+    ++board_.counts.gaps;
+    reader.consumer().take(record);
+    return Step::Served;
+  }
+  if (!owner.takesRingRequests()) return Step::Held;
+  try {
+    return record.kind == TARNRING_MESSAGE ? serveMessage(reader, owner, record) : serveFrame(reader, owner, record);
+  } catch (const std::bad_alloc&) {
+    return Step::Held;  // it waits in the ring until there is memory for it
+  }
+}
+
+ConnectionRings::Step ConnectionRings::serveMessage(RingReader& reader, RingOwner& owner, const ring::Record& record) {
+  switch (decodeMessage(record)) {
     case ShapeTable::Decoded::UnknownShape:
       // It may be on its way on the socket still.
-      return reader.ending() ? refuseRecord(reader, TARNRING_UNKNOWN_SHAPE) : Step::Held;
+      return reader.ending() ? refuseRecord(reader, record, TARNRING_UNKNOWN_SHAPE) : Step::Held;
     case ShapeTable::Decoded::BadValues:
-      return refuseRecord(reader, TARNRING_BAD_VALUES);
+      return refuseRecord(reader, record, TARNRING_BAD_VALUES);
     case ShapeTable::Decoded::Ok:
       break;
   }
-  return serveRequest(reader, owner);
+  return serveRequest(reader, owner, record);
 }
 
-ShapeTable::Decoded ConnectionRings::decodeMessage(std::span<const std::byte> content) {
+ShapeTable::Decoded ConnectionRings::decodeMessage(const ring::Record& record) {
   const MemoryReserve::Refusable refusable;
-  return shapes_.decode(content, board_.request);
+  return shapes_.decode(contentOf(record), board_.request);
 }
 
-// Once it is handed over it can't be taken back to be tried again.
-ConnectionRings::Step ConnectionRings::serveRequest(RingReader& reader, RingOwner& owner) {
+// The record is taken before it is handed over: the recorder may commit what comes of it while this turn goes on, and a
+// service that is killed then must not leave it in the ring for the next one. Once it is handed over it can't be taken
+// back to be tried again.
+ConnectionRings::Step ConnectionRings::serveRequest(RingReader& reader, RingOwner& owner, const ring::Record& record) {
   board_.counts.messages += board_.request.operation == wire::Operation::SendMessage ? 1 : 0;
-  const bool taken =
+  reader.consumer().take(record);
+  const bool served =
       MemoryReserve::orGiveUp(MemoryReserve::Loss::Request, [&] { owner.serveRingRequest(board_.request); });
-  return taken ? Step::Served : refuseRecord(reader, TARNRING_OUT_OF_MEMORY);
+  if (!served) {
+    countRefusal(reader, TARNRING_OUT_OF_MEMORY);
+  }
+  return Step::Served;
 }
 
-ConnectionRings::Step ConnectionRings::serveFrame(RingReader& reader, RingOwner& owner,
-                                                  std::span<const std::byte> content) {
-  switch (board_.decoder.decode(content, board_.request, board_.refusal)) {
+ConnectionRings::Step ConnectionRings::serveFrame(RingReader& reader, RingOwner& owner, const ring::Record& record) {
+  switch (board_.decoder.decode(contentOf(record), board_.request, board_.refusal)) {
     case wire::DecodeVerdict::Unreadable:
-      return refuseRecord(reader, TARNRING_UNREADABLE);
+      return refuseRecord(reader, record, TARNRING_UNREADABLE);
     case wire::DecodeVerdict::Refused:
       if (board_.refusal.code == wire::ErrorCode::OutOfMemory) return Step::Held;  // it waits until there is some
-      return refuseRecord(reader, refusalOf(board_.refusal.code));
+      return refuseRecord(reader, record, refusalOf(board_.refusal.code));
     case wire::DecodeVerdict::Ok:
       break;
   }
   if (board_.request.operation == wire::Operation::DeclareShape) {
-    return shapes_.declare(board_.request.dictionary).ok() ? Step::Served
-                                                           : refuseRecord(reader, TARNRING_BAD_ARGUMENTS);
+    if (shapes_.declare(board_.request.dictionary).failed()) {
+return refuseRecord(reader, record, TARNRING_BAD_ARGUMENTS);
+}
+    reader.consumer().take(record);
+    return Step::Served;
   }
   if (wire::rowOf(board_.request.operation).servedBy == wire::ServedBy::Host) {
-    return refuseRecord(reader, TARNRING_UNKNOWN_OPERATION);
+    return refuseRecord(reader, record, TARNRING_UNKNOWN_OPERATION);
   }
-  return serveRequest(reader, owner);
+  return serveRequest(reader, owner, record);
 }
 
 // Counted, and gone on with.
-ConnectionRings::Step ConnectionRings::refuseRecord(RingReader& reader, tarnring_refusal reason) {
+ConnectionRings::Step ConnectionRings::refuseRecord(RingReader& reader, const ring::Record& record,
+                                                    tarnring_refusal reason) {
+  countRefusal(reader, reason);
+  reader.consumer().take(record);
+  return Step::Served;
+}
+
+void ConnectionRings::countRefusal(RingReader& reader, tarnring_refusal reason) {
   board_.counts.count(reason);
   reader.consumer().refuse(reason);
-  return Step::Served;
 }
 
 // Once the work that the records became has run, the recorder has got what comes of it.

@@ -73,8 +73,8 @@ class ConnectionRings : public std::enable_shared_from_this<ConnectionRings> {
   // any more. To be called once.
   void end(Drained drained);
 
-  // For the board: serves up to a turn's share, beginning with another ring each time, tells clients what was taken,
-  // and lets rings that had nothing for a while sleep. Whether the share was used up, so that there is more to serve
+  // For the board: serves up to a turn's share, beginning with another ring each time, and lets rings that had nothing
+  // for a while sleep. Whether the share was used up, so that there is more to serve
   // right now.
   bool serveTurn(std::chrono::nanoseconds now);
   // Whether a ring is awake, or waits for the recorder at least. Else the board forgets this until activate().
@@ -94,11 +94,14 @@ class ConnectionRings : public std::enable_shared_from_this<ConnectionRings> {
   // Takes what it read off `share`, in bytes with the records' heads. True: a record is held.
   bool serveRing(RingReader& reader, std::size_t& share);
   Step serveRecord(RingReader& reader, RingOwner& owner, std::size_t& share);
-  Step serveMessage(RingReader& reader, RingOwner& owner, std::span<const std::byte> content);
-  ShapeTable::Decoded decodeMessage(std::span<const std::byte> content);
-  Step serveRequest(RingReader& reader, RingOwner& owner);
-  Step serveFrame(RingReader& reader, RingOwner& owner, std::span<const std::byte> content);
-  Step refuseRecord(RingReader& reader, tarnring_refusal reason);
+  Step serveContent(RingReader& reader, RingOwner& owner, const ring::Record& record);
+  Step serveMessage(RingReader& reader, RingOwner& owner, const ring::Record& record);
+  ShapeTable::Decoded decodeMessage(const ring::Record& record);
+  Step serveRequest(RingReader& reader, RingOwner& owner, const ring::Record& record);
+  Step serveFrame(RingReader& reader, RingOwner& owner, const ring::Record& record);
+  Step refuseRecord(RingReader& reader, const ring::Record& record, tarnring_refusal reason);
+  void countRefusal(RingReader& reader, tarnring_refusal reason);
+  std::span<const std::byte> contentOf(const ring::Record& record) const { return {buffer_.data(), record.length}; }
   void close(RingReader& reader);
   // Lets go of rings that ended and are safe on the disk, as the client reads that off the ring; at the connection's
   // end without waiting for it. Calls drained_ after the last.

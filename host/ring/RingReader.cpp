@@ -17,7 +17,8 @@ RingReader::RingReader(RingMemory memory, UniqueDescriptor wake, std::uint64_t f
       wake_(std::move(wake)),
       consumer_(memory_.header(), memory_.data(), memory_.dataBytes(), firstSleep),
       onWake_(std::move(onWake)),
-      dropped_(consumer_.dropped()) {
+      // What was dropped while an earlier service read it was told to that one. Nobody read this one yet: all is new.
+      dropped_(consumer_.taken() == 0 ? 0 : consumer_.dropped()) {
   marks_.reserve(kMostMarks);
 }
 

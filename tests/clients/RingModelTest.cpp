@@ -74,7 +74,6 @@ class Play {
     while (true) {
       const bool over = schedule_.firstIsOver();
       const bool any = readSome(consumer);
-      consumer.publish();
       for (std::uint64_t rest = slowness_; rest > 0 && !over; --rest) {
         schedule_.step();
       }
@@ -94,7 +93,7 @@ class Play {
       if (look != Look::Record) break;
       any = true;
       take(record);
-      consumer.accept(record);
+      consumer.take(record);
     }
     return any;
   }

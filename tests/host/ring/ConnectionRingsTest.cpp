@@ -52,6 +52,20 @@ TEST_F(ConnectionRingsTest, WhatARecordAskedForMayBeDoneBeforeTheNextIsRead) {
   running_.onQueue([&] { EXPECT_EQ(owner_->workedOff, (std::vector<std::size_t>{1, 2, 3})); });
 }
 
+// A service that is killed later must not leave it to the next one, which would serve it again.
+TEST_F(ConnectionRingsTest, ARecordIsTakenBeforeItIsHandedOver) {
+  start();
+  ClientRing ring;
+  ASSERT_EQ(declare(5), "");
+  for (std::uint64_t number = 0; number < 3; ++number) {
+    ASSERT_TRUE(ring.message(5, {number}));
+  }
+  running_.onQueue([&] { owner_->watched = ring.header(); });
+  ASSERT_EQ(open(ring).error.text(), "");
+  ASSERT_TRUE(eventuallyServed(3));
+  running_.onQueue([&] { EXPECT_EQ(owner_->takenThen, (std::vector<std::uint64_t>{1, 2, 3})); });
+}
+
 TEST_F(ConnectionRingsTest, FramesOfTheWireAreServedToo) {
   start();
   ClientRing ring;
@@ -155,16 +169,33 @@ TEST_F(ConnectionRingsTest, DroppedMessagesReachTheLedger) {
   ASSERT_EQ(declare(5), "");
   while (ring.message(5, {1})) {
   }
-  ring.message(5, {1});
+  ring.message(5, {1});  // two are dropped before anybody reads the ring
   const std::uint64_t posted = seen(ring.header()->posted);
-  ring.header()->dropped -= 2;  // what was dropped before it was opened isn't this connection's
   ASSERT_EQ(open(ring).error.text(), "");
-  ring.header()->dropped += 2;
   EXPECT_TRUE(eventuallyServed(posted));
   EXPECT_TRUE(eventually([&] { return counts().droppedByClients == 2; }));
   ring.message(5, {1});
   EXPECT_TRUE(eventuallyServed(posted + 1));
   EXPECT_EQ(counts().gaps, 1U);
+  EXPECT_EQ(counts().droppedByClients, 2U);
+}
+
+TEST_F(ConnectionRingsTest, OfARingThatWasReadBeforeOnlyWhatIsDroppedNowCounts) {
+  start();
+  ClientRing ring;
+  ASSERT_EQ(declare(5), "");
+  ASSERT_TRUE(ring.message(5, {1}));
+  ASSERT_EQ(open(ring).error.text(), "");
+  ASSERT_TRUE(eventually([&] { return seen(ring.header()->taken_messages) == 1; }));
+  ASSERT_TRUE(end());
+  ring.header()->dropped += 3;
+  rings_ = running_.onQueue([&] { return board_->connect(owner_); });
+  ASSERT_EQ(open(ring).error.text(), "");
+  ASSERT_EQ(declare(5), "");
+  ring.header()->dropped += 2;
+  ASSERT_TRUE(ring.message(5, {2}));
+  ASSERT_TRUE(eventuallyServed(2));
+  EXPECT_TRUE(eventually([&] { return counts().droppedByClients == 2; }));
 }
 
 TEST_F(ConnectionRingsTest, CommittedFollowsTheRecorder) {

@@ -24,6 +24,9 @@ class NotingOwner : public linux_host::RingOwner {
   bool takesRingRequests() override { return takes; }
   void serveRingRequest(wire::DecodedRequest& request) override {
     if (hasNoMemory) throw std::bad_alloc();
+    if (watched != nullptr) {
+      takenThen.push_back(ring::SharedWords::loadAcquire(&watched->taken_messages));
+    }
     requests.push_back(request);
     ++count;
   }
@@ -36,6 +39,9 @@ class NotingOwner : public linux_host::RingOwner {
   std::atomic<std::size_t> count{0};
   std::vector<wire::DecodedRequest> requests;
   std::vector<std::size_t> workedOff;  // so many requests had come each time
+  // A ring, and how many of its messages were taken by its header when each request came.
+  const tarnring_header* watched = nullptr;
+  std::vector<std::uint64_t> takenThen;
 
  private:
   linux_host::MainLoop& loop_;
