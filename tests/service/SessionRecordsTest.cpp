@@ -54,7 +54,8 @@ class SessionRecordsTest : public ServiceFixture {
   // Whose work it was to send each message of one of the telemetry service's sessions.
   std::vector<Number> ownersOfMirror(std::size_t session) const {
     std::vector<Number> owners;
-    for (const auto& message : platform_.rtcReporting.sessions().at(session).messages) {
+    const auto sessions = platform_.rtcReporting.sessions();
+    for (const auto& message : sessions.at(session).messages) {
       owners.push_back(message.session);
     }
     return owners;

@@ -27,6 +27,8 @@ class SocketSharesTest : public testing::SocketFixture {
     EXPECT_TRUE(eventually([&] { return events().size() == static_cast<std::size_t>(count) + 1; }));
     return placeOf("2 createReportingSession 2");
   }
+
+  std::atomic<bool> crowded{false};  // as the recorder would say
 };
 
 TEST_F(SocketSharesTest, LongWorkOfOneClientLeavesTheOthersTheirTurns) {
@@ -126,9 +128,8 @@ TEST_F(SocketSharesTest, ABusyClientLeavesEachOtherItsShareOfATurn) {
 }
 
 TEST_F(SocketSharesTest, WhoMadeItCrowdedStopsAndStatusIsAnswered) {
-  std::atomic<bool> crowded{false};
   serve();
-  running_.onQueue([&] { host_->gate.setCrowdSource([&] { return crowded.load(); }); });
+  running_.onQueue([&] { host_->gate.setCrowdSource([this] { return crowded.load(); }); });
   TestClient client(path_);
   ASSERT_TRUE(client.ask(1, requestOf(Operation::CreateReportingSession, 1)));
   crowded = true;
@@ -142,11 +143,10 @@ TEST_F(SocketSharesTest, WhoMadeItCrowdedStopsAndStatusIsAnswered) {
 }
 
 TEST_F(SocketSharesTest, LongWorkOfWhoMadeItCrowdedStopsToo) {
-  std::atomic<bool> crowded{false};
   service_->slices = 1000;
-  service_->onSlice = [&](int left) { crowded = left <= 500; };
+  service_->onSlice = [this](int left) { crowded = left <= 500; };
   serve();
-  running_.onQueue([&] { host_->gate.setCrowdSource([&] { return crowded.load(); }); });
+  running_.onQueue([&] { host_->gate.setCrowdSource([this] { return crowded.load(); }); });
   TestClient client(path_);
   client.request(1, requestOf(Operation::StopReportingSessionForID, 7));
   ASSERT_TRUE(eventually([&] { return crowded.load(); }));
