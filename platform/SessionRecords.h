@@ -6,6 +6,7 @@
 
 #include <cstdint>
 #include <string>
+#include <string_view>
 
 namespace tarn::platform {
 
@@ -35,6 +36,25 @@ enum class SessionEnd {
   ClientGone,       // the connection ended while it ran or before it ever ran
   ServiceStopping,  // the service was asked to stop while it ran or before it ever ran
 };
+
+// The word for it, by which people and files know it.
+constexpr std::string_view nameOf(SessionEnd end) noexcept {
+  switch (end) {
+    case SessionEnd::Stopped:
+      return "stopped";
+    case SessionEnd::Destroyed:
+      return "destroyed";
+    case SessionEnd::Replaced:
+      return "replaced";
+    case SessionEnd::Retyped:
+      return "retyped";
+    case SessionEnd::ClientGone:
+      return "client-gone";
+    case SessionEnd::ServiceStopping:
+      return "service-stopping";
+  }
+  return "stopped";
+}
 
 // Owned by the platform, which may lack it: then nobody keeps them. Nothing here blocks; what is written, and when, is
 // the keeper's. What memory is missing for throws std::bad_alloc and hasn't happened.

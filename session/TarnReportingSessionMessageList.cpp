@@ -126,17 +126,20 @@ void TarnReportingSessionMessageList::Iterator::skipLost() {
   }
 }
 
-void TarnReportingSessionMessageList::goBack(const std::function<bool(TarnReportingSessionMessage::Kind)>& wants,
+void TarnReportingSessionMessageList::goBack(std::size_t end,
+                                             const std::function<bool(TarnReportingSessionMessage::Kind)>& wants,
                                              const std::function<bool(std::size_t, const Record&)>& take) const {
-  std::size_t index = size();
-  for (auto record = recent().rbegin(); record != recent().rend(); ++record) {
-    if (!take(--index, *record)) return;
+  if (end > overflowed_) {
+    const auto first = recent().begin();
+    for (auto record = first + static_cast<std::ptrdiff_t>(end - overflowed_); record != first;) {
+      if (!take(--end, *--record)) return;
+    }
   }
-  for (std::size_t part = parts_.size(); part > 0; --part) {
+  for (std::size_t part = end > 0 ? partOf(end - 1) + 1 : 0; part > 0; --part) {
     if (!parts_[part - 1].page->contents().mayHave(wants)) continue;
     const Opened& opened = open(part - 1);
-    for (index = opened.records.size(); index > 0; --index) {
-      if (!take(opened.first + index - 1, opened.records[index - 1])) return;
+    for (std::size_t left = std::min(opened.records.size(), end - opened.first); left > 0; --left) {
+      if (!take(opened.first + left - 1, opened.records[left - 1])) return;
     }
   }
 }

@@ -94,9 +94,9 @@ class TarnReportingSessionMessageList {
       noteChange(index);
     }
   }
-  // Calls take(index, record) from the last record to the first, for as long as it returns true. Pages of which
-  // wants(kind) is true for none of the kinds are passed over.
-  void goBack(const std::function<bool(TarnReportingSessionMessage::Kind)>& wants,
+  // Calls take(index, record) from the record before `end` to the first, for as long as it returns true. Pages of which
+  // wants(kind) is true for none of the kinds are passed over. Nothing may be appended to this list meanwhile.
+  void goBack(std::size_t end, const std::function<bool(TarnReportingSessionMessage::Kind)>& wants,
               const std::function<bool(std::size_t, const Record&)>& take) const;
   // How often records of pages were changed in place. Who keeps a record that was read back looks here whether it may
   // be stale.

@@ -46,25 +46,13 @@ void TarnReportingSessionMessageLog::Body::note(Newest& ofTheKind, std::size_t i
 
 void TarnReportingSessionMessageLog::sort() {
   if (!body_) return;
-  auto& newest = body_->newest;
   try {
     if (!body_->messages.sort()) return;
   } catch (...) {  // for want of memory; records that are pointed to may be gone
-    body_->forgetPlaces();
+    body_->forgetPlaces(0);
     throw;
   }
-  body_->forgetPlaces();
-  // What is still missing at the end lay in pages that are lost.
-  std::size_t missing = newest.size();
-  const auto isMissing = [&](TarnReportingSessionMessage::Kind kind) { return newest[kind].index == kNone; };
-  body_->messages.goBack(isMissing, [&](std::size_t index, const Record& record) {
-    Newest& ofTheKind = newest[record->kind()];
-    if (ofTheKind.index == kNone) {
-      ofTheKind = {index, record.get(), nullptr};
-      --missing;
-    }
-    return missing > 0;
-  });
+  body_->forgetPlaces(body_->messages.size());
 }
 
 void TarnReportingSessionMessageLog::clear() {
@@ -78,6 +66,9 @@ const TarnReportingSessionMessage* TarnReportingSessionMessageLog::newest(AudioE
   const auto found = body.newest.find(TarnReportingSessionMessage::kindOf(category, type));
   if (found == body.newest.end()) return nullptr;
   Newest& newest = found->second;
+  if (newest.index == kNone) [[unlikely]] {
+    body.lookFor(newest);
+  }
   if (newest.index >= body.messages.overflowed()) return newest.recent;
   // A producer may have changed what was read back.
   if (body.changesSeen != body.messages.changes()) {
@@ -94,11 +85,27 @@ const TarnReportingSessionMessage* TarnReportingSessionMessageLog::newest(AudioE
 }
 
 // The kinds stay: each that the log has is known.
-void TarnReportingSessionMessageLog::Body::forgetPlaces() noexcept {
+void TarnReportingSessionMessageLog::Body::forgetPlaces(std::size_t unseenRecords) noexcept {
   for (auto& [kind, ofTheKind] : newest) {
     ofTheKind = {};
   }
   kept = 0;
+  unseen = unseenRecords;
+}
+
+void TarnReportingSessionMessageLog::Body::lookFor(const Newest& sought) {
+  const auto isMissing = [this](TarnReportingSessionMessage::Kind kind) { return newest[kind].index == kNone; };
+  messages.goBack(unseen, isMissing, [&](std::size_t index, const Record& record) {
+    Newest& ofTheKind = newest[record->kind()];
+    if (ofTheKind.index == kNone) {
+      ofTheKind = {index, record.get(), nullptr};
+    }
+    unseen = index;
+    return sought.index == kNone;
+  });
+  if (sought.index == kNone) {
+    unseen = 0;  // it lay in a page that is lost
+  }
 }
 
 void TarnReportingSessionMessageLog::Body::forgetKept() {

@@ -19,24 +19,6 @@ constexpr double kSecondsBetweenLooks = 10;
 // Rows of runs; those before go when there are more.
 constexpr std::int64_t kMostRuns = 1000;
 
-const char* reasonOf(platform::SessionEnd end) noexcept {
-  switch (end) {
-    case platform::SessionEnd::Stopped:
-      return "stopped";
-    case platform::SessionEnd::Destroyed:
-      return "destroyed";
-    case platform::SessionEnd::Replaced:
-      return "replaced";
-    case platform::SessionEnd::Retyped:
-      return "retyped";
-    case platform::SessionEnd::ClientGone:
-      return "client-gone";
-    case platform::SessionEnd::ServiceStopping:
-      return "service-stopping";
-  }
-  return "stopped";
-}
-
 // An upsert that says all that is known, and leaves what the row has of its beginning.
 constexpr const char* kDescribe =
     "INSERT INTO sessions(id, run, reporter, connection, pid, uid, process, application, service_type, service_name, "
@@ -194,10 +176,10 @@ int SessionTable::write(const SessionNote& note, double seconds) {
       return start(note);
     case What::Stopped:
       code = closePeriod(note);
-      return code == SQLITE_OK ? setEnd(rowOf(note.session), &note, "stopped") : code;
+      return code == SQLITE_OK ? setEnd(rowOf(note.session), &note, platform::SessionEnd::Stopped) : code;
     case What::Ended:
       code = closePeriod(note);
-      return code == SQLITE_OK ? setEnd(rowOf(note.session), &note, reasonOf(note.end)) : code;
+      return code == SQLITE_OK ? setEnd(rowOf(note.session), &note, note.end) : code;
   }
   return code;
 }
@@ -226,7 +208,7 @@ int SessionTable::start(const SessionNote& note) {
   }
   forgetLast();
   int code = start_.bind(1, row).bind(2, rowOf(note.session)).bind(3, note.time).run();
-  return code == SQLITE_OK ? setEnd(rowOf(note.session), nullptr, nullptr) : code;
+  return code == SQLITE_OK ? setEnd(rowOf(note.session), nullptr, {}) : code;
 }
 
 int SessionTable::closePeriod(const SessionNote& note) {
@@ -242,9 +224,9 @@ int SessionTable::closePeriod(const SessionNote& note) {
   return stop_.run();
 }
 
-int SessionTable::setEnd(std::int64_t session, const SessionNote* note, const char* reason) {
+int SessionTable::setEnd(std::int64_t session, const SessionNote* note, platform::SessionEnd end) {
   setEnd_.bind(1, session).bind(2, *run_);
-  note == nullptr ? setEnd_.bindNull(3).bindNull(4) : setEnd_.bind(3, note->time).bind(4, std::string_view(reason));
+  note == nullptr ? setEnd_.bindNull(3).bindNull(4) : setEnd_.bind(3, note->time).bind(4, platform::nameOf(end));
   return setEnd_.run();
 }
 

@@ -94,7 +94,8 @@ class SessionTable {
   [[nodiscard]] int describe(const SessionNote& note);
   [[nodiscard]] int start(const SessionNote& note);
   [[nodiscard]] int closePeriod(const SessionNote& note);
-  [[nodiscard]] int setEnd(std::int64_t session, const SessionNote* note, const char* reason);
+  // Null: it has none.
+  [[nodiscard]] int setEnd(std::int64_t session, const SessionNote* note, platform::SessionEnd end);
   [[nodiscard]] int noteAge(std::int64_t session, double seconds);
   void forgetLast() noexcept;
 

@@ -51,7 +51,7 @@ class RecordingSessionRecords final : public platform::SessionRecords {
   }
   void ended(Number session, platform::SessionEnd end) override {
     const OwnMemory own;
-    tell("ended", session, " " + std::string(nameOf(end)));
+    tell("ended", session, " " + std::string(platform::nameOf(end)));
   }
   Number enter(Number session) noexcept override { return std::exchange(current_, session); }
 
@@ -81,23 +81,6 @@ class RecordingSessionRecords final : public platform::SessionRecords {
   std::size_t sessions() const noexcept { return facts_.size(); }
 
  private:
-  static constexpr std::string_view nameOf(platform::SessionEnd end) {
-    switch (end) {
-      case platform::SessionEnd::Stopped:
-        return "stopped";
-      case platform::SessionEnd::Destroyed:
-        return "destroyed";
-      case platform::SessionEnd::Replaced:
-        return "replaced";
-      case platform::SessionEnd::Retyped:
-        return "retyped";
-      case platform::SessionEnd::ClientGone:
-        return "client-gone";
-      case platform::SessionEnd::ServiceStopping:
-        return "service-stopping";
-    }
-    return "no end";
-  }
   void tell(std::string_view verb, Number session, std::string_view rest = {}) {
     const OwnMemory own;
     if (verb == failing_) throw std::bad_alloc();

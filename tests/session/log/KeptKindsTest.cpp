@@ -3,10 +3,12 @@
 
 #include <cstdint>
 #include <memory>
+#include <random>
 #include <utility>
 
 #include "session/TarnReportingSessionMessageLog.h"
 #include "tests/session/log/MessageListFixture.h"
+#include "tests/support/Seeds.h"
 
 namespace tarn {
 namespace {
@@ -158,6 +160,54 @@ TEST_F(KeptKinds, KindOfWhichNothingIsLeftAfterASortIsNotFound) {
   EXPECT_EQ(look(0), 0);
   EXPECT_EQ(look(1), 1);
   EXPECT_EQ(look(2), -1);
+}
+
+TEST_F(KeptKinds, SortReadsNoPagesForTheLookUp) {
+  addKinds(0, 20);
+  log_.append(ofKind(20, 20, -1));
+  log_.sort();
+  EXPECT_EQ(platform_.overflow.blocksRead(), 0U);
+}
+
+TEST_F(KeptKinds, AfterASortALookUpReadsBackNoFurtherThanToTheKind) {
+  addKinds(0, 20);
+  log_.append(ofKind(20, 20, -1));
+  log_.sort();
+  EXPECT_EQ(readsOf(18, 20), 2U);
+  EXPECT_EQ(readsOf(17, 18), 1U);
+}
+
+TEST_F(KeptKinds, MessageThatCameAfterASortIsFoundWithoutLookingBack) {
+  addKinds(0, 20);
+  log_.append(ofKind(20, 20, -1));
+  log_.sort();
+  addKinds(3, 4);
+  EXPECT_EQ(readsOf(3, 4), 1U);
+}
+
+TEST_F(KeptKinds, WhatIsFoundIsWhatAWalkFinds) {
+  for (const std::uint64_t seed : testSeeds(3)) {
+    SCOPED_TRACE(seedNote(seed));
+    std::mt19937 random(static_cast<std::mt19937::result_type>(seed));
+    setBounds(random() % 2 == 0 ? 1000 : kNoBound, kNoBound);
+    TarnReportingSessionMessageLog log(7);
+    for (int n = 0; n < 1000; ++n) {
+      const int kind = static_cast<int>(random() % 12);
+      const auto category = static_cast<AudioEventCategory>(kind);
+      log.append(ofKind(kind, n, static_cast<double>(n - static_cast<int>(random() % 7))));
+      if (random() % 50 == 0) {
+        log.sort();
+      }
+      const auto asked = static_cast<AudioEventCategory>(random() % 13);
+      const TarnReportingSessionMessage* const found = log.newest(asked, AudioEventType::State);
+      std::int64_t expected = -1;
+      for (const auto& record : log.messages()) {
+        expected = record->category() == asked ? record->message().get("n").asInt64() : expected;
+      }
+      ASSERT_EQ(found == nullptr ? -1 : found->message().get("n").asInt64(), expected) << "of " << n;
+      ASSERT_NE(log.newest(category, AudioEventType::State), nullptr);
+    }
+  }
 }
 
 TEST_F(KeptKinds, FirstMessageInMemoryIsLetGoWhenItIsMoved) {

@@ -3,6 +3,7 @@
 
 #include <algorithm>
 #include <cstdint>
+#include <numeric>
 #include <string>
 #include <vector>
 
@@ -227,15 +228,33 @@ TEST_F(OverlappingPages, AreGoneThroughBackwardsWithTheirPlaces) {
   fillPages(list, 3);
   std::vector<std::size_t> places;
   std::vector<std::int64_t> found;
-  list.goBack([](TarnReportingSessionMessage::Kind) { return true; },
-              [&](std::size_t place, const Record& record) {
-                places.push_back(place);
-                found.push_back(numberOf(record));
-                return true;
-              });
+  list.goBack(
+      list.size(), [](TarnReportingSessionMessage::Kind) { return true; },
+      [&](std::size_t place, const Record& record) {
+        places.push_back(place);
+        found.push_back(numberOf(record));
+        return true;
+      });
   EXPECT_EQ(found, downFrom(22));
   EXPECT_TRUE(std::equal(places.begin(), places.end(), found.begin(), found.end(),
                          [](std::size_t place, std::int64_t n) { return static_cast<std::int64_t>(place) == n; }));
+}
+
+TEST_F(OverlappingPages, AreGoneThroughBackwardsFromAnyPlace) {
+  List list;
+  fillPages(list, 3);
+  for (std::size_t end = 0; end <= list.size(); ++end) {
+    std::vector<std::size_t> places;
+    list.goBack(
+        end, [](TarnReportingSessionMessage::Kind) { return true; },
+        [&](std::size_t place, const Record&) {
+          places.push_back(place);
+          return true;
+        });
+    std::vector<std::size_t> expected(end);
+    std::iota(expected.rbegin(), expected.rend(), std::size_t{0});
+    EXPECT_EQ(places, expected);
+  }
 }
 
 }  // namespace

@@ -308,7 +308,7 @@ TEST_F(MessageList, GoingBackEndsWhenTheTakerHasEnough) {
   const auto any = [](TarnReportingSessionMessage::Kind) { return true; };
   const auto takeUntil = [&](std::size_t enough) {
     taken = 0;
-    list.goBack(any, [&](std::size_t, const Record&) { return ++taken < enough; });
+    list.goBack(list.size(), any, [&](std::size_t, const Record&) { return ++taken < enough; });
   };
   takeUntil(1);
   EXPECT_EQ(taken, 1U);
@@ -419,13 +419,14 @@ TEST_F(MessageList, GoingBackPassesOverPagesWithoutTheKinds) {
   fill(list, 200);
   const auto wanted = TarnReportingSessionMessage::kindOf(AudioEventCategory::Setup, AudioEventType::Start);
   std::vector<std::size_t> found;
-  list.goBack([&](TarnReportingSessionMessage::Kind kind) { return kind == wanted; },
-              [&](std::size_t index, const Record& record) {
-                if (record->kind() == wanted) {
-                  found.push_back(index);
-                }
-                return true;
-              });
+  list.goBack(
+      list.size(), [&](TarnReportingSessionMessage::Kind kind) { return kind == wanted; },
+      [&](std::size_t index, const Record& record) {
+        if (record->kind() == wanted) {
+          found.push_back(index);
+        }
+        return true;
+      });
   EXPECT_EQ(found, std::vector<std::size_t>{0});
   EXPECT_EQ(platform_.overflow.blocksRead(), 1U);
 }
