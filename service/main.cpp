@@ -3,12 +3,10 @@
 // A signal ends the clients in order, with their sessions. The process then ends without tearing the parts down: what
 // the back-ends hold is committed, then it exits at once.
 #include <cstdint>
-#include <cstdio>
 #include <cstdlib>
 #include <exception>
 #include <iostream>
 #include <memory>
-#include <new>
 #include <string>
 #include <utility>
 
@@ -21,6 +19,7 @@
 #include "host/settings/HostPaths.h"
 #include "host/settings/ServiceOptions.h"
 #include "host/system/Heap.h"
+#include "host/system/StartWithoutMemory.h"
 #include "service/TarnReportingService.h"
 #include "service/TarnReportingWorkerClasses.h"
 #include "service/vocabulary/ProcessState.h"
@@ -33,25 +32,17 @@ namespace {
 
 using namespace linux_host;
 
-constexpr std::string_view kModule = "main";
-
 // One line for whoever started the service.
 int refuse(const std::string& complaint, std::int64_t exitStatus = kExitFailure) {
   std::cerr << "tarnreportingd: " << complaint << '\n';
   return static_cast<int>(exitStatus);
 }
 
-// Of memory or threads.
-int refuseForWantOf(const std::exception& shortage) {
-  const bool isMemory = dynamic_cast<const std::bad_alloc*>(&shortage) != nullptr;
-  return refuse(isMemory ? "out of memory" : shortage.what());
-}
-
 std::shared_ptr<TarnReportingService> makeService(platform::Log& log) {
   TarnReportingSession::setAllWorkerClasses(TarnReportingWorkerClasses());
   std::shared_ptr<TarnReportingService> service = TarnReportingService::create();
   if (TarnReportingSystemMonitor::TarnReportingDefaults()["disable_reporting"].asBool()) {
-    logPrefixed(log, kHostCategory, platform::LogLevel::Default, kModule,
+    logPrefixed(log, kHostCategory, platform::LogLevel::Default, "main",
                 "reporting is disabled by the service's defaults");
     service->setReportingEnabled(false);
   }
@@ -72,28 +63,6 @@ ServiceCounts countsOf(const TarnReportingService& service) {
   return counts;
 }
 
-// Until somebody can connect, memory that is missing where nobody can catch that, as for the keys that are made before
-// main(), ends the process in one line.
-struct StartWithoutMemory {
-  [[noreturn]] static void end() noexcept;
-  std::terminate_handler usual = std::set_terminate(&end);
-};
-const StartWithoutMemory startWithoutMemory __attribute__((init_priority(101)));
-
-void StartWithoutMemory::end() noexcept {
-  try {
-    if (const std::exception_ptr reason = std::current_exception()) {
-      std::rethrow_exception(reason);
-    }
-  } catch (const std::bad_alloc&) {
-    static_cast<void>(std::fputs("tarnreportingd: out of memory\n", stderr));
-    std::_Exit(kExitFailure);
-  } catch (...) {  // what the usual end tells
-  }
-  startWithoutMemory.usual();
-  std::abort();
-}
-
 // Serves until a signal; the exit status.
 int serve(LinuxPlatform& platform, HostSetup& setup) {
   MainLoop& loop = platform.loop();
@@ -110,7 +79,7 @@ int serve(LinuxPlatform& platform, HostSetup& setup) {
   // Only now is there anything to connect to: who can reach the service finds it whole, its notifications heard.
   const Status listening = platform.listen(std::move(setup.socket), service, [&service] { return countsOf(*service); });
   if (listening.failed()) return refuse(listening->text);
-  std::set_terminate(startWithoutMemory.usual);
+  StartWithoutMemory::over();
   platform.serve();
   return kExitSuccess;
 }
@@ -133,7 +102,7 @@ int run(int argumentCount, char** arguments) {
   try {
     status = serve(platform, setup);
   } catch (const std::exception& shortage) {  // before anybody can connect
-    refuseForWantOf(shortage);
+    refuse(StartWithoutMemory::textOf(shortage));
   }
   setup.settleLog();
   std::_Exit(status);  // other threads still use the platform's parts
@@ -146,6 +115,6 @@ int main(int argumentCount, char** arguments) {
   try {
     return tarn::run(argumentCount, arguments);
   } catch (const std::exception& shortage) {
-    return tarn::refuseForWantOf(shortage);
+    return tarn::refuse(tarn::linux_host::StartWithoutMemory::textOf(shortage));
   }
 }

@@ -243,8 +243,8 @@ ConnectionRings::Step ConnectionRings::serveFrame(RingReader& reader, RingOwner&
   }
   if (board_.request.operation == wire::Operation::DeclareShape) {
     if (shapes_.declare(board_.request.dictionary).failed()) {
-return refuseRecord(reader, record, TARNRING_BAD_ARGUMENTS);
-}
+      return refuseRecord(reader, record, TARNRING_BAD_ARGUMENTS);
+    }
     reader.consumer().take(record);
     return Step::Served;
   }
