@@ -126,6 +126,32 @@ TEST_F(SessionCommandsTest, SessionsAreALineEach) {
             "13  2026-11-20 08:00:00  film  812  org.example.film  longformaudio  0.0 s  0  open\n");
 }
 
+TEST_F(SessionCommandsTest, ThoseThatNeverRanBeforeTheyGotTheirTypeAreNotListed) {
+  makeTwo();
+  Session untyped;
+  untyped.ended = kBegin + 1;
+  untyped.endReason = "retyped";
+  for (const std::int64_t id : {11, 20, 21}) {
+    untyped.id = id;
+    addSession(untyped);
+  }
+  addPeriod(20, kBegin, kBegin + 1);
+  untyped.id = 22;
+  untyped.endReason = "replaced";
+  addSession(untyped);
+  const auto ids = [this](const std::string& options) {
+    std::string all;
+    for (const json& each : lines(ctl("sessions --json " + options).output)) {
+      all += std::to_string(each.at("id").get<int>()) + " ";
+    }
+    return all;
+  };
+  EXPECT_EQ(ids(""), "12 13 20 22 ");
+  EXPECT_EQ(ids("--limit 2"), "20 22 ");
+  EXPECT_EQ(ids("--all"), "11 12 13 20 21 22 ");
+  EXPECT_EQ(ids("--all --limit 2"), "21 22 ");
+}
+
 TEST_F(SessionCommandsTest, SessionsAsJsonAreWhatTheQueryAsksFor) {
   makeTwo();
   const auto ids = [this](const std::string& options) {

@@ -50,13 +50,13 @@ TEST(SessionMessage, AStampMayBeADateOrMissing) {
 }
 
 TEST(SessionMessage, DatesAreTextsThatADateIsWrittenAs) {
-  EXPECT_EQ(secondsOfDateText("1970-01-01T00:00:00Z"), 0);
-  EXPECT_EQ(secondsOfDateText("1969-12-31T23:59:59Z"), -1);
-  EXPECT_EQ(secondsOfDateText("2000-02-29T12:00:00Z"), 951825600);
-  EXPECT_EQ(secondsOfDateText("2026-11-20T07:00:00.125Z"), 1795158000.125);
+  EXPECT_EQ(report::secondsOfDateText("1970-01-01T00:00:00Z"), 0);
+  EXPECT_EQ(report::secondsOfDateText("1969-12-31T23:59:59Z"), -1);
+  EXPECT_EQ(report::secondsOfDateText("2000-02-29T12:00:00Z"), 951825600);
+  EXPECT_EQ(report::secondsOfDateText("2026-11-20T07:00:00.125Z"), 1795158000.125);
   for (const char* text : {"", "2026-11-20", "2026-11-20T07:00:00", "2026-11-20 07:00:00Z", "2026-02-30T00:00:00Z",
                            "2026-11-20T07:00:00.0Z", "2026-11-20T07:00:61Z", "2026-11-20T07:00:00ZZ", "1-1-1T1:1:1Z"}) {
-    EXPECT_FALSE(secondsOfDateText(text).has_value()) << text;
+    EXPECT_FALSE(report::secondsOfDateText(text).has_value()) << text;
   }
 }
 
@@ -71,6 +71,17 @@ TEST(SessionMessage, WhatTheServiceMadeIsKnownByWhatOnlyItWrites) {
   EXPECT_FALSE(isDerived("Session_Generic.Summary", R"({"n":1})"));
   EXPECT_FALSE(isDerived("Flume.Simple", R"({"n":1})"));
   EXPECT_FALSE(isDerived("Setup.Setup", R"({"ringerstate":true,"last_updated":1.0})"));
+}
+
+TEST(SessionMessage, MeansWhatAReportTakesItFor) {
+  const auto meaning = [](const char* kind, const char* payload) {
+    return messageOf(row(std::string("sys.oxbow.wisp.") + kind, payload))->meaning;
+  };
+  EXPECT_EQ(meaning("DSP_Error.Generic", "{}"), report::MessageKind::Error);
+  EXPECT_EQ(meaning("IO.IssueDetector", R"({"issue_type":"Silence"})"), report::MessageKind::Issue);
+  EXPECT_EQ(meaning("IO.Error", R"({"issue_type":"overload"})"), report::MessageKind::Overload);
+  EXPECT_EQ(meaning("Volume.Summary", R"({"msgidx":1,"msgcnt":2})"), report::MessageKind::VolumeSegment);
+  EXPECT_EQ(meaning("Volume.Summary", "{}"), report::MessageKind::Plain);
 }
 
 TEST(SessionMessage, AnOverloadIsWhatTheSummaryCounts) {

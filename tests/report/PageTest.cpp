@@ -67,10 +67,11 @@ RangePicture rangeOf(std::int64_t count, const std::string& name) {
 
 TEST(ReportPage, SessionHasItsFactsItsTimelineAndItsSegments) {
   Report report;
-  report.sessions.push_back(OneSession()
-                                .message(20, "Playback.Start", R"("session_output_running":true)")
-                                .message(90, "Volume.Summary", R"("play_seconds":20,"KvSessionVolume":0.5)")
-                                .picture());
+  report.sessions.push_back(
+      OneSession()
+          .message(20, "Playback.Start", R"("session_output_running":true)")
+          .message(90, "Volume.Summary", R"("msgidx":1,"msgcnt":1,"play_seconds":20,"KvSessionVolume":0.5)")
+          .picture());
   const std::string html = page(report);
   EXPECT_NE(html.find("<section id=\"session-1\"><h3>Session 1: org.example.player, longformaudio</h3>"),
             std::string::npos);

@@ -120,9 +120,9 @@ TEST(RangePicture, PlayIsCountedByTheNearestSixteenth) {
   builder.add(sessionRow(1, 0, 100));
   for (const auto& [volume, seconds] :
        {std::pair("0.5", 20), std::pair("0.53", 3), std::pair("0.54", 4), std::pair("1", 5), std::pair("7", 6)}) {
-    builder.add(
-        messageRow(1, 90, "Volume.Summary",
-                   std::string(R"("KvSessionVolume":)") + volume + R"(,"play_seconds":)" + std::to_string(seconds)));
+    builder.add(messageRow(1, 90, "Volume.Summary",
+                           std::string(R"("msgidx":1,"msgcnt":1,"KvSessionVolume":)") + volume + R"(,"play_seconds":)" +
+                               std::to_string(seconds)));
   }
   const RangePicture picture = builder.picture();
   EXPECT_EQ(picture.playSeconds[8], 23);
@@ -135,7 +135,7 @@ TEST(RangePicture, NonsenseOfASegmentDoesNotCount) {
   builder.add(sessionRow(1, 0, 100));
   for (const char* const members : {R"("KvSessionVolume":-1,"play_seconds":5)", R"("KvSessionVolume":0.5)",
                                     R"("KvSessionVolume":0.5,"play_seconds":-5)"}) {
-    builder.add(messageRow(1, 90, "Volume.Summary", members));
+    builder.add(messageRow(1, 90, "Volume.Summary", std::string(R"("msgidx":1,"msgcnt":1,)") + members));
   }
   const RangePicture picture = builder.picture();
   EXPECT_EQ(std::accumulate(picture.playSeconds.begin(), picture.playSeconds.end(), 0.0), 0);

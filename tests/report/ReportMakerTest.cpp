@@ -64,7 +64,7 @@ TEST_F(ReportMaker, EventsOfTheRangeAreCountedBySession) {
   file_.message("2", 150, "Performance.Generic", R"({"issue_type":"quiet"})");
   file_.message("2", 160, "Error.Generic");
   file_.message("2", 165, "DSP_Error.Generic");
-  file_.message("2", 170, "Volume.Summary", R"({"play_seconds":20,"KvSessionVolume":0.5})");
+  file_.message("2", 170, "Volume.Summary", R"({"msgidx":1,"msgcnt":1,"play_seconds":20,"KvSessionVolume":0.5})");
   file_.message("NULL", 170, "IO.Error", kOverload);
   file_.event("1", 50, "tally", "sys.oxbow.longformaudio.IO.Error", kOverload);
   file_.event("1", 50, "rtc", "sendMessage", kOverload);

@@ -115,11 +115,14 @@ TEST(SessionPicture, IssueTellsWhatAndWhere) {
 TEST(SessionPicture, DerivedSegmentsHaveTheirNumbersAndChangeNoLane) {
   const SessionPicture picture =
       OneSession()
-          .message(90, "Volume.Summary",
-                   R"("play_seconds":20,"KvSessionVolume":0.5,"active_devices":"Speaker","mFormatID":"aac")")
-          .message(90, "Input.Summary",
-                   R"("inputrunning_seconds":60,"active_devices":"Microphone","vocoders":"opus:48000.0")")
-          .message(90, "Lagoon.Summary", R"("play_seconds":100,"active_devices":"Room","mFormatID":"flac")")
+          .message(
+              90, "Volume.Summary",
+              R"("msgidx":1,"msgcnt":1,"play_seconds":20,"KvSessionVolume":0.5,"active_devices":"Speaker","mFormatID":"aac")")
+          .message(
+              90, "Input.Summary",
+              R"("msgidx":1,"msgcnt":1,"inputrunning_seconds":60,"active_devices":"Microphone","vocoders":"opus:48000.0")")
+          .message(90, "Lagoon.Summary",
+                   R"("msgidx":1,"msgcnt":1,"play_seconds":100,"active_devices":"Room","mFormatID":"flac")")
           .picture();
   EXPECT_EQ(picture.segments,
             (std::vector<Segment>{{Segment::Kind::Output, 20, 0.5, "Speaker", "aac"},
@@ -130,18 +133,43 @@ TEST(SessionPicture, DerivedSegmentsHaveTheirNumbersAndChangeNoLane) {
 }
 
 TEST(SessionPicture, SummaryOfAClientsOwnIsAPlainMessage) {
-  const SessionPicture picture = OneSession().message(20, "Playback.Summary", R"("KvSessionVolume":0.25)").picture();
-  EXPECT_EQ(picture.volume, (std::vector<Step>{{kStart + 20, 0.25}}));
+  const SessionPicture picture = OneSession()
+                                     .message(20, "Playback.Summary", R"("KvSessionVolume":0.25)")
+                                     .message(30, "Volume.Summary", R"("KvSessionVolume":0.5,"play_seconds":7)")
+                                     .message(40, "Session_Generic.Summary", R"("total_active_time":1)")
+                                     .message(50, "Flume.Simple", R"("KvSessionVolume":0.75)")
+                                     .picture();
+  EXPECT_EQ(picture.volume, (std::vector<Step>{{kStart + 20, 0.25}, {kStart + 30, 0.5}, {kStart + 50, 0.75}}));
   EXPECT_TRUE(picture.segments.empty());
+  EXPECT_FALSE(picture.totals);
+}
+
+TEST(SessionPicture, FormatThatWasChosenGoesBeforeItsKind) {
+  const auto formatOf = [](const std::string& members) {
+    return OneSession()
+        .message(90, "Volume.Summary", R"("msgidx":1,"msgcnt":1,"mFormatID":"aac")" + members)
+        .picture()
+        .segments.at(0)
+        .format;
+  };
+  EXPECT_EQ(formatOf(""), "aac");
+  EXPECT_EQ(formatOf(R"(,"session_selected_format":"unknown")"), "aac");
+  EXPECT_EQ(formatOf(R"(,"session_selected_format":"flac 44100 Hz stereo")"), "flac 44100 Hz stereo");
+}
+
+TEST(SessionPicture, StampMayBeADate) {
+  OneSession rows;
+  rows.events.push_back(messageRow(1, 90, "Error.Error", R"("tarnreporting_timestamp":"2026-11-20T10:00:30Z")"));
+  EXPECT_EQ(timesOf(rows.picture().errors), (Times{30}));
 }
 
 TEST(SessionPicture, LastSummaryOfTheSessionCounts) {
   const SessionPicture picture =
       OneSession()
-          .message(50, "Session_Generic.Summary", R"("total_active_time":1)")
+          .message(50, "Session_Generic.Summary", R"("summaryServiceName":"wisp","total_active_time":1)")
           .message(
               90, "Session_Generic.Summary",
-              R"("total_active_time":4,"active_count":2,"overload_count":1,"num_messages":3,"num_unique_messages":5)")
+              R"("summaryServiceName":"wisp","total_active_time":4,"active_count":2,"overload_count":1,"num_messages":3,"num_unique_messages":5)")
           .picture();
   ASSERT_TRUE(picture.totals);
   EXPECT_EQ(*picture.totals, (SessionTotals{4, 2, 1, 3, 5}));
@@ -182,11 +210,12 @@ TEST(SessionPicture, StampAMinuteOutsideTheSessionsLifeIsTaken) {
 }
 
 TEST(SessionPicture, SessionThatWasPlayedAgainIsDrawnInItsMessagesTime) {
-  const SessionPicture picture = OneSession()
-                                     .stamped(20, 100'020, "Playback.Start", kOn)
-                                     .stamped(20, 100'050, "Playback.Stop", kOff)
-                                     .message(90, "Session_Generic.Summary", R"("active_count":2)")
-                                     .picture();
+  const SessionPicture picture =
+      OneSession()
+          .stamped(20, 100'020, "Playback.Start", kOn)
+          .stamped(20, 100'050, "Playback.Stop", kOff)
+          .message(90, "Session_Generic.Summary", R"("summaryServiceName":"wisp","active_count":2)")
+          .picture();
   EXPECT_TRUE(picture.inMessagesTime);
   EXPECT_EQ(fromStart(picture.output), (Spans{{100'020, 100'050, ""}}));
   EXPECT_EQ(picture.from, kStart + 100'020);

@@ -14,7 +14,8 @@ class Oracle:
         self.since, self.until, self.now = since, until, now
         self.sessions = {row[0]: row for row in self.database.execute(
             "SELECT id, application, service_name, created, ended, process, pid, end_reason FROM sessions "
-            "WHERE created < ?1 AND (ended IS NULL OR ended >= ?2)", (until, since))}
+            "WHERE created < ?1 AND (ended IS NULL OR ended >= ?2) AND NOT (coalesce(end_reason, '') = 'retyped' "
+            "AND id NOT IN (SELECT session FROM periods))", (until, since))}
         self.messages = [(session, time, name[len(PREFIX):], json.loads(payload)) for session, time, name, payload in
                          self.database.execute("SELECT session, time, name, payload FROM events "
                                                "WHERE backend = 'tally' AND substr(name, 1, ?) = ? "

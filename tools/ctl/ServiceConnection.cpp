@@ -28,11 +28,11 @@ bool nobodyListens(std::int64_t errorNumber) {
   return errorNumber == ENOENT || errorNumber == ECONNREFUSED || errorNumber == ENOTDIR;
 }
 
-std::string silence(const std::string& socket, milliseconds timeout) {
+}  // namespace
+
+std::string silenceText(const std::string& socket, milliseconds timeout) {
   return "the service at " + socket + " does not answer within " + secondsText(timeout);
 }
-
-}  // namespace
 
 std::string secondsText(milliseconds time) {
   return plist::ValueView(std::chrono::duration<double>(time).count()).asText() + " s";
@@ -51,13 +51,12 @@ Reached reachService(const ServiceAddress& address, const client::Options& optio
       return reached;
     }
     const std::int64_t code = connected.error.code();
-    if (code == EACCES || code == EPERM) {
-      reached.complaint = "the service can't be reached: " + socket +
-                          " refuses this user: " + std::generic_category().message(static_cast<int>(code));
-      return reached;
-    }
-    tried += (tried.empty() ? "" : "; ") + connected.error->text;
-    if (!nobodyListens(code)) break;
+    const bool isRefused = code == EACCES || code == EPERM;
+    tried += tried.empty() ? "" : "; ";
+    tried += isRefused ? socket + " refuses this user: " + std::generic_category().message(static_cast<int>(code))
+                       : connected.error->text;
+    reached.isAbsent = nobodyListens(code);
+    if (!reached.isAbsent) break;
   }
   reached.complaint = "the service can't be reached: " + tried;
   return reached;
@@ -72,7 +71,7 @@ int waitForService(const ServiceAddress& address, milliseconds longest) {
       const Reply reply = reached.client->call(client::status(), left(deadline));
       if (reply.ok()) return kSuccess;
       if (reply.outcome == Outcome::TimedOut) {
-        complain(silence(reached.socket, longest));
+        complain(silenceText(reached.socket, longest));
         return kUnreachable;
       }
     }
@@ -104,7 +103,7 @@ Answer askService(const ServiceAddress& address, const client::Request& request)
       answer.status = kFailure;
       break;
     case Outcome::TimedOut:
-      complain(silence(reached.socket, address.timeout));
+      complain(silenceText(reached.socket, address.timeout));
       answer.status = kUnreachable;
       break;
     default:
@@ -117,11 +116,15 @@ Answer askService(const ServiceAddress& address, const client::Request& request)
 
 int settleService(const ServiceAddress& address) {
   const Reached reached = reachService(address);
-  if (!reached.client) return kSuccess;
+  if (!reached.client) {
+    if (reached.isAbsent) return kSuccess;
+    complain(reached.complaint);
+    return kUnreachable;
+  }
   const Reply reply = reached.client->call(client::settle(), address.timeout);
   if (reply.ok()) return kSuccess;
   complain(reply.outcome == Outcome::TimedOut
-               ? silence(reached.socket, address.timeout)
+               ? silenceText(reached.socket, address.timeout)
                : "no answer from the service at " + reached.socket + ": " + reply.error.text);
   return kUnreachable;
 }

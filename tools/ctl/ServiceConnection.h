@@ -23,6 +23,7 @@ struct Reached {
   std::unique_ptr<client::ClientConnection> client;  // null when nobody was reached
   std::string socket;                                // where
   std::string complaint;                             // why not, with each place that was tried
+  bool isAbsent = false;                             // nobody listens at any of them
 };
 // Connects to the first socket on which somebody listens; one that refuses this user is not passed over. A socket with
 // nobody behind it is passed over, any other failure ends the search. Says nothing on stderr.
@@ -43,10 +44,12 @@ struct Answer {
 Answer askService(const ServiceAddress& address, const client::Request& request);
 
 // Waits until all that was handed over to the service by now is committed, and so is what the ends of clients make that
-// have gone, at most so long as for an answer. A service that isn't there has nothing waiting. The exit status; what
-// went wrong was said on stderr.
+// have gone, at most so long as for an answer. A service that isn't there has nothing waiting; one that refuses this
+// user is unreachable. The exit status; what went wrong was said on stderr.
 int settleService(const ServiceAddress& address);
 
+// "the service at SOCKET does not answer within 5 s"
+std::string silenceText(const std::string& socket, std::chrono::milliseconds timeout);
 // "5 s", "0.25 s"
 std::string secondsText(std::chrono::milliseconds time);
 

@@ -1,7 +1,9 @@
-// Message: what an analytics event says of a message of a session, with its fields by their keys.
+// Message: what an analytics event says of a message of a session, with its fields by their keys. Whoever looks at
+// sessions goes by this: what counts as an overload, an error or an issue, what the service derived, and when a message
+// happened.
 //
 // Every message becomes two analytics events and, as a rule, one of the mirrored session; the one that is named after
-// the system alone stands for the message here. Threads: plain data.
+// the system alone stands for the message in a report. Threads: plain data.
 #pragma once
 
 #include <optional>
@@ -19,7 +21,7 @@ enum class MessageKind {
   Overload,       // its issue_type is overload, and it tells no duration: as the session's own summary counts
   Error,          // of the category or the type Error, and no overload
   Issue,          // of the type IssueDetector, and no overload
-  VolumeSegment,  // derived at the stop, as all that follow
+  VolumeSegment,  // derived at the stop, as all that follow: told from a client's by what the service alone writes
   InputSegment,
   GroupSegment,
   SessionSummary,
@@ -34,11 +36,17 @@ class Message {
  public:
   // Nothing for events of other back-ends and of other names. A payload that is no JSON object reads as an empty one.
   static std::optional<Message> of(const EventRow& row);
+  // Of this name ("Playback.Start"), handed over at that time; nothing for a payload that is no JSON object.
+  static std::optional<Message> from(std::string_view name, double arrived, std::string_view payload);
 
   MessageKind kind() const noexcept { return kind_; }
-  // "Playback.Start"
+  // The service made it of others or of the drivers' counters, when the session stopped.
+  bool isDerived() const noexcept { return kind_ >= MessageKind::VolumeSegment; }
+  // "Playback.Start", and its parts.
   std::string_view name() const noexcept { return name_; }
-  // When it was handed over, and when it happened by its own stamp; nothing without a stamp.
+  std::string_view category() const noexcept;
+  std::string_view type() const noexcept;
+  // When it was handed over, and when it happened by its own stamp, a number or a date; nothing without one.
   double arrived() const noexcept { return arrived_; }
   std::optional<double> stamp() const;
 
@@ -54,6 +62,9 @@ class Message {
   plist::Dictionary fields_;
   MessageKind kind_ = MessageKind::Plain;
 };
+
+// The seconds of a date as JSON has it (2026-11-20T10:00:00Z); nothing for a text that no date is written as.
+std::optional<double> secondsOfDateText(std::string_view text);
 
 // Whether the fields may tell what the kind is or hold what a report over many sessions counts, by the event's name
 // alone; without one of these a payload need not be read unless it mentions an overload.

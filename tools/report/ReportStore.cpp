@@ -70,8 +70,9 @@ Status ReportStore::each(const std::string& sql, const TimeRange& range, const S
 
 Result<std::vector<SessionRow>> ReportStore::sessions(const TimeRange& range) {
   Result<std::vector<SessionRow>> read;
-  read.error = each(std::string(kSelectSessions) + "WHERE created < ?2 AND coalesce(ended, ?1) >= ?1 ORDER BY id",
-                    range, [&](const recorder::Statement& row) { read.value.push_back(sessionRow(row)); });
+  const std::string sql = std::string(kSelectSessions) + "WHERE created < ?2 AND coalesce(ended, ?1) >= ?1 AND " +
+                          std::string(recorder::kIsUsed) + " ORDER BY id";
+  read.error = each(sql, range, [&](const recorder::Statement& row) { read.value.push_back(sessionRow(row)); });
   return read;
 }
 

@@ -25,7 +25,8 @@ class ReportStore {
 
   // To be called once, before anything else. Every error names the file.
   [[nodiscard]] Status open() { return moment_.open(); }
-  // Sessions of which a part lies in the range, by their ids.
+  // Sessions of which a part lies in the range, by their ids; without those that made way for another before they ever
+  // ran (recorder::kIsUsed).
   Result<std::vector<SessionRow>> sessions(const TimeRange& range);
   // Those of these that are there.
   Result<std::vector<SessionRow>> sessionsOf(const std::vector<std::int64_t>& ids);

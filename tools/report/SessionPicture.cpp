@@ -18,10 +18,6 @@ struct Moment {
   const Message* message = nullptr;
 };
 
-bool isDerived(const Message& message) {
-  return message.kind() >= MessageKind::VolumeSegment;
-}
-
 double endOf(const SessionRow& session, double now) {
   return std::max(session.created, session.ended.value_or(now));
 }
@@ -36,7 +32,7 @@ void chooseTime(const std::vector<Message>& messages, SessionPicture& picture) {
   std::vector<double> outside;
   for (const Message& message : messages) {
     const std::optional<double> stamp = message.stamp();
-    if (isDerived(message) || !stamp) continue;
+    if (message.isDerived() || !stamp) continue;
     if (isWithin(*stamp, picture)) {
       ++inside;
     } else {
@@ -58,7 +54,7 @@ std::vector<Moment> momentsOf(const std::vector<Message>& messages, const Sessio
     const double stamp = message.stamp().value_or(message.arrived());
     const bool fits = picture.inMessagesTime ? stamp >= picture.from && stamp <= picture.to : isWithin(stamp, picture);
     const double instead = picture.inMessagesTime ? picture.to : message.arrived();
-    moments.push_back({isDerived(message) || !fits ? instead : stamp, &message});
+    moments.push_back({message.isDerived() || !fits ? instead : stamp, &message});
   }
   std::stable_sort(moments.begin(), moments.end(), [](const Moment& a, const Moment& b) { return a.at < b.at; });
   return moments;
@@ -160,7 +156,7 @@ void Lanes::takeFault(const Moment& moment) {
 }
 
 void Lanes::take(const Moment& moment) {
-  if (isDerived(*moment.message)) return;
+  if (moment.message->isDerived()) return;
   takeState(moment);
   takeFault(moment);
 }
@@ -169,6 +165,13 @@ void Lanes::finish() {
   for (Open* open : {&output_, &input_, &route_, &group_}) {
     end(*open, picture_.to);
   }
+}
+
+// What was chosen says more than the kind of the format, and isn't always told.
+std::string formatOf(const Message& message) {
+  std::string chosen = message.text("session_selected_format");
+  const bool isTold = !chosen.empty() && chosen != "unknown";
+  return isTold ? std::move(chosen) : message.text("mFormatID");
 }
 
 Segment segmentOf(const Message& message) {
@@ -183,7 +186,7 @@ Segment segmentOf(const Message& message) {
     segment.volume = message.number("KvSessionVolume");
   }
   segment.route = message.text("active_devices");
-  segment.format = message.text(isInput ? "vocoders" : "mFormatID");
+  segment.format = isInput ? message.text("vocoders") : formatOf(message);
   return segment;
 }
 

@@ -82,7 +82,8 @@ Result<std::vector<SessionRow>> SessionReader::sessions(const SessionQuery& quer
   sql.append(" WHERE 1");
   sql.append(query.since ? " AND (ended IS NULL OR ended >= ?1)" : "").append(query.until ? " AND created < ?2" : "");
   sql.append(query.applicationGlob ? " AND matches_glob(?3, application)" : "");
-  sql.append(query.open ? " AND ended IS NULL" : "").append(" ORDER BY id DESC");
+  sql.append(query.open ? " AND ended IS NULL" : "");
+  sql.append(query.used ? " AND " : "").append(query.used ? kIsUsed : "").append(" ORDER BY id DESC");
   sql.append(query.limit ? " LIMIT ?4" : "");
   Result<std::vector<SessionRow>> found;
   const std::string glob = query.applicationGlob.value_or("");

@@ -15,6 +15,7 @@
 #include <map>
 #include <optional>
 #include <string>
+#include <string_view>
 #include <utility>
 #include <vector>
 
@@ -74,8 +75,14 @@ struct SessionQuery {
   std::optional<double> until;
   std::optional<std::string> applicationGlob;  // see globMatches
   bool open = false;                           // only those that haven't ended
+  bool used = false;                           // only those of kIsUsed
   std::optional<std::size_t> limit;            // the newest so many
 };
+
+// What holds of a row of `sessions` unless a change of its type made another one in its place before it ever ran: most
+// clients make a session and then say what it is for.
+inline constexpr std::string_view kIsUsed =
+    "(end_reason IS NOT 'retyped' OR EXISTS (SELECT 1 FROM periods WHERE session = sessions.id))";
 
 class SessionReader {
  public:

@@ -99,11 +99,9 @@ class SessionsCommand : public ServiceFixture {
     play(script);
     ASSERT_EQ(stopService(SIGTERM), 0);
   }
-  // Those that ran: a session that gets its type before it starts takes the place of one without a type.
-  std::vector<json> sessions() {
-    std::vector<json> all = jsonLines(ctl({"sessions", "--json"}).output);
-    std::erase_if(all, [](const json& session) { return session.at("end_reason") == "retyped"; });
-    return all;
+  std::vector<json> sessions(std::vector<std::string> words = {}) {
+    words.insert(words.begin(), {"sessions", "--json"});
+    return jsonLines(ctl(words).output);
   }
   // What was derived: the segments but for when they were told, and of the session's own summary what its messages say.
   std::vector<std::string> derived() {
@@ -134,6 +132,17 @@ TEST_F(SessionsCommand, AreTheSessionsThatClientsMade) {
   const Finished shown = ctl({"show", all[0].at("id").dump()});
   EXPECT_EQ(shown.status, 0) << shown.complaints;
   EXPECT_NE(shown.output.find(kApplication), std::string::npos) << shown.output;
+}
+
+TEST_F(SessionsCommand, ListOneThatGotItsTypeBeforeItRanOnce) {
+  record(RandomScript(1).text());
+  EXPECT_EQ(sessions().size(), 1U);
+  const auto all = sessions({"--all"});
+  ASSERT_EQ(all.size(), 2U);
+  EXPECT_EQ(all[0].at("end_reason"), "retyped");
+  EXPECT_EQ(all[1], sessions().front());
+  const Finished report = ctl({"report"});
+  EXPECT_NE(report.output.find(": 1 session.</p>"), std::string::npos);
 }
 
 TEST_F(SessionsCommand, AScriptOfOneDerivesTheSameOnAFreshService) {

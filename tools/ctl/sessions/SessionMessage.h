@@ -11,6 +11,7 @@
 #include "plist/Dictionary.h"
 #include "plist/Result.h"
 #include "recorder/store/reading/EventReader.h"
+#include "tools/report/Message.h"
 
 namespace tarn::ctl {
 
@@ -22,6 +23,7 @@ struct SessionMessage {
   std::string type;
   // As the workers got it, of JSON's kinds: a date is its text.
   plist::Dictionary payload;
+  report::MessageKind meaning = report::MessageKind::Plain;
   // The service made it of others or of the drivers' counters, when the session stopped.
   bool isDerived = false;
 
@@ -37,12 +39,13 @@ std::optional<SessionMessage> messageOf(const recorder::EventRow& row);
 Result<std::vector<SessionMessage>> messagesOf(const std::filesystem::path& file, std::int64_t session);
 
 // Whether it tells of an overload, as the session's own summary counts them.
-bool isOverload(const SessionMessage& message);
+inline bool isOverload(const SessionMessage& message) {
+  return message.meaning == report::MessageKind::Overload;
+}
 // Whether it is the session's own summary.
-bool isSessionSummary(const SessionMessage& message);
-
-// The seconds of a date as JSON has it (2026-11-20T10:00:00Z); nothing for a text that no date is written as.
-std::optional<double> secondsOfDateText(std::string_view text);
+inline bool isSessionSummary(const SessionMessage& message) {
+  return message.meaning == report::MessageKind::SessionSummary;
+}
 
 // The numbers that the service prints as these names, the least of several; nothing for a text that is none.
 std::optional<std::uint32_t> categoryNumber(std::string_view name);

@@ -84,7 +84,7 @@ void Writer::addConfigurationBefore(const SessionMessage& message) {
 void Writer::addMessage(const SessionMessage& message) {
   plist::Dictionary payload = message.payload;
   const plist::ValueView stamp = payload.get(keys::kTimestamp);
-  const auto date = stamp.isText() ? secondsOfDateText(stamp.text()) : std::nullopt;
+  const auto date = stamp.isText() ? report::secondsOfDateText(stamp.text()) : std::nullopt;
   if (date) {
     payload.set(keys::kTimestamp, plist::Date{*date});
   }

@@ -90,7 +90,7 @@ void Walk::takeGroup(const SessionMessage& message) {
 }
 
 void Walk::takeFaults(const SessionMessage& message) {
-  const bool isFault = message.type == "Error" || message.category == "Error" || message.type == "IssueDetector";
+  const bool isFault = message.meaning == report::MessageKind::Error || message.meaning == report::MessageKind::Issue;
   const plist::ValueView issue = message.payload.get("issue_type");
   if (isOverload(message)) {
     timeline_.overloads.push_back({message.stamp, message.kind()});

@@ -34,7 +34,7 @@ struct SessionTimeline {
   std::vector<Span> routes;
   std::vector<Level> volumes;  // its changes
   std::vector<Mark> overloads;
-  std::vector<Mark> errors;  // messages of the type Error, of the category Error and of the type IssueDetector
+  std::vector<Mark> errors;  // errors and issues (report::MessageKind)
   // What changed, a line each: "output runs, route Speaker, volume 0.5".
   std::vector<Mark> steps;
 };

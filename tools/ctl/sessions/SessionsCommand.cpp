@@ -22,6 +22,7 @@ struct Arguments {
   std::string applicationGlob;
   std::size_t limit = 0;
   bool asJson = false;
+  bool all = false;
 };
 
 Paint paintOf(const std::string& state) {
@@ -59,6 +60,7 @@ int sessions(const Context& context, Arguments& arguments, bool hasGlob, bool ha
   if (!isNamed(context.stateDirectory, "--state-dir") || !arguments.range.read()) return kWrongUsage;
   arguments.query.since = arguments.range.since;
   arguments.query.until = arguments.range.until;
+  arguments.query.used = !arguments.all;
   if (hasGlob) {
     arguments.query.applicationGlob = arguments.applicationGlob;
   }
@@ -105,6 +107,7 @@ void addSessionsCommand(CLI::App& app, Context& context) {
   command->footer(
       "\nReads the recorder in the state directory; the service need not run. Times are local ones. ACTIVE is the "
       "time\n"
+  command->add_flag("--all", arguments->all, "Also those that one of another type replaced before they ever ran");
       "between starts and stops. END says how the session ended: stopped, destroyed, replaced, retyped, client-gone,\n"
       "service-stopping or killed; running and open ones haven't.\n\n"
       "Examples:\n"

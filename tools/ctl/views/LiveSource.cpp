@@ -46,6 +46,7 @@ void LiveSource::askStatus(TopSample& sample) {
   if (!client_ || !client_->connected()) {
     Reached reached = reachService(address_);
     client_ = std::move(reached.client);
+    socket_ = std::move(reached.socket);
     sample.whyNot = std::move(reached.complaint);
     if (!client_) return;
   }
@@ -55,8 +56,8 @@ void LiveSource::askStatus(TopSample& sample) {
     return;
   }
   sample.whyNot = reply.outcome == client::Outcome::TimedOut
-                      ? "the service does not answer within " + secondsText(address_.timeout)
-                      : "no answer from the service: " + reply.error.text;
+                      ? silenceText(socket_, address_.timeout)
+                      : "no answer from the service at " + socket_ + ": " + reply.error.text;
   client_.reset();
 }
 

@@ -40,6 +40,7 @@ class LiveSource final : public TopSource {
   const ServiceAddress address_;
   const std::string store_;
   std::unique_ptr<client::ClientConnection> client_;
+  std::string socket_;  // where it leads
   // The id up to which events were counted; nothing before the first look and in a file that began anew.
   std::optional<std::int64_t> countedTo_;
   std::int64_t newest_ = 0;            // at this look
