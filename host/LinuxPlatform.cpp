@@ -7,6 +7,8 @@
 #include <cstdio>
 #include <cstdlib>
 #include <limits>
+#include <map>
+#include <string>
 #include <utility>
 
 #include "host/log/PrefixedLog.h"
@@ -53,6 +55,16 @@ recorder::RecorderOptions recorderOptions(const HostConfiguration& configuration
   options.sessionOf = &WorkOwner::current;
   options.version = TARN_VERSION;
   return options;
+}
+
+plist::Dictionary expiredStatus(const std::map<recorder::Owner, std::uint64_t>& expired) {
+  plist::Dictionary status;
+  for (const auto& [owner, events] : expired) {
+    const std::string nobody = owner == recorder::kServiceItself ? "service" : "others";
+    const std::string name = owner >= 0 ? std::to_string(owner) : nobody;
+    status.set(std::string_view(name), events);
+  }
+  return status;
 }
 
 plist::Dictionary lossStatus() {
@@ -296,6 +308,7 @@ plist::Dictionary LinuxPlatform::status() {
                                   counters.failed, counters.lostBefore});
   status.set("quotas", connections_.quotaUse());
   status.set("out_of_memory", lossStatus());
+  status.set("recorder_expired_by_user", expiredStatus(recorder_.expiredByOwner()));
   return status;
 }
 

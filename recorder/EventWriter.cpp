@@ -32,7 +32,8 @@ std::int64_t capOf(const RecorderOptions& options) {
 }
 
 RetentionLimits limitsOf(const RecorderOptions& options) {
-  return {capOf(options), options.maxAgeDays * kSecondsADay};
+  return {capOf(options), options.maxAgeDays * kSecondsADay,
+          std::max(options.summaryMaxAgeDays, options.maxAgeDays) * kSecondsADay};
 }
 
 // One transaction of a small file must not outgrow what retention keeps free.

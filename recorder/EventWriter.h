@@ -18,6 +18,7 @@
 #include <chrono>
 #include <cstddef>
 #include <cstdint>
+#include <map>
 #include <memory>
 #include <optional>
 #include <string>
@@ -76,6 +77,8 @@ class EventWriter {
   bool hasMoreToBringIn() const noexcept { return file_.isOpen() && file_.hasMoreToBringIn(); }
   // Events removed by retention since the start.
   std::uint64_t expired() const noexcept { return file_.expired(); }
+  // The same by whose they were. Threads: any.
+  std::map<Owner, std::uint64_t> expiredByOwner() const { return file_.expiredByOwner(); }
   // How fast it goes.
   const CommitPace& pace() const noexcept { return pace_; }
   const std::string& problem() const noexcept { return problem_; }

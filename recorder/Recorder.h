@@ -23,6 +23,7 @@
 #include <cstdint>
 #include <filesystem>
 #include <list>
+#include <map>
 #include <memory>
 #include <optional>
 #include <string_view>
@@ -98,6 +99,8 @@ class Recorder {
   std::size_t roomUntilCrowded() const noexcept { return room_.load(std::memory_order_relaxed); }
   // All counters of one moment. Threads: any.
   RecorderCounters counters() const;
+  // Events removed by retention, by the uid of their session; see Retention for those of nobody. Threads: any.
+  std::map<Owner, std::uint64_t> expiredByOwner() const { return writer_.expiredByOwner(); }
   // Commits what was handed over before the call without waiting for company, blocking for at most `timeout`. Whether
   // all of it is committed; false when the time is up or when any event was given up. Threads: any but the writer's.
   [[nodiscard]] bool flush(std::chrono::milliseconds timeout);

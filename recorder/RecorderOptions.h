@@ -18,13 +18,16 @@ struct RecorderOptions {
   // its own.
   std::filesystem::path file;
 
-  // Retention: beyond either, the oldest events go first. A megabyte is 2^20 bytes; at least one is kept. The size is
-  // that of the database with its log, of files set aside, and of the files in these folders; see StateUsage.
+  // Retention: beyond the size the oldest messages of the user with most go first, and summaries last. A megabyte is
+  // 2^20 bytes; at least one is kept. The size is that of the database with its log, of files set aside, and of the
+  // files in these folders; see StateUsage.
   std::int64_t maxMegabytes = 256;
   std::vector<std::filesystem::path> folders;
   // What else counts as part of that size: bytes that others keep for a while; null: none.
   std::shared_ptr<const std::atomic<std::int64_t>> others;
+  // How old messages get, and what was made of them; that is no less.
   double maxAgeDays = 30;
+  double summaryMaxAgeDays = 120;
   // How often an idle recorder looks for events that have grown too old. Ages are days, so a minute is soon enough; a
   // busy one looks with each commit.
   std::chrono::milliseconds maintenanceInterval{60'000};

@@ -120,7 +120,7 @@ struct Setting {
 
 using Node = const toml::node&;
 using Host = HostConfiguration&;
-constexpr std::array<Setting, 27> kSettings{{
+constexpr std::array<Setting, 28> kSettings{{
     {"tally", "in_use", [](Node node, Host host) { return take(node, host.tally.inUse); }},
     {"rtc", "backends", [](Node node, Host host) { return take(node, host.rtc.backends); }},
     {"rtc", "no_backends", [](Node node, Host host) { return take(node, host.rtc.noBackends); }},
@@ -137,6 +137,8 @@ constexpr std::array<Setting, 27> kSettings{{
      [](Node node, Host host) { return takeWithin<1, 1048576>(node, host.recorder.maxMegabytes); }},
     {"recorder", "max_age_days",
      [](Node node, Host host) { return takeWithin<1, 36500>(node, host.recorder.maxAgeDays); }},
+    {"recorder", "summary_max_age_days",
+     [](Node node, Host host) { return takeWithin<1, 36500>(node, host.recorder.summaryMaxAgeDays); }},
     {"limits", "max_frame_bytes",
      [](Node node, Host host) { return takeWithin<64, 67108864>(node, host.limits.maxFrameBytes); }},
     {"limits", "half_frame_ms",

@@ -67,6 +67,7 @@ void CarryOver::open(const EventFile& into) {
                                     "ORDER BY first DESC LIMIT 1"));
   const auto before = connection_.integer("SELECT value FROM recorder_state WHERE name = 'holds_after'");
   wanted_ = before ? *before + 1 : 0;
+  removedIds_.prepare(connection_);
   last_ = upTo_ ? *upTo_ : lastToLookFor(into.lastId());
 }
 
@@ -135,7 +136,7 @@ Status CarryOver::writeSome(EventFile& into) {
   if (auto error = into.commit(); error.failed()) return error;
   for (const Read& row : some_) {
     if (wanted_ > 0 && wanted_ < row.id) {
-      addRange(lost_, {wanted_, row.id - 1});
+      miss({wanted_, row.id - 1});
     }
     wanted_ = std::max(wanted_, row.id + 1);
     if (first_ == 0) {
@@ -147,12 +148,24 @@ Status CarryOver::writeSome(EventFile& into) {
   return {};
 }
 
+void CarryOver::miss(IdRange gap) {
+  std::vector<IdRange> removed;
+  static_cast<void>(removedIds_.within(gap, removed));
+  for (const IdRange& range : removed) {
+    addRange(removed_, range);
+  }
+  for (const IdRange& range : without(gap, removed)) {
+    addRange(lost_, range);
+  }
+}
+
 Status CarryOver::finish(EventFile& into) {
   rows_.finalize();
   groups_.finalize();
   if (wanted_ > 0 && wanted_ <= last_) {
-    addRange(lost_, {wanted_, last_});
+    miss({wanted_, last_});
   }
+  removedIds_.finalize();
   wanted_ = 0;
   into.skipTo(last_);
   if (auto error = into.begin(); error.failed()) return error;
@@ -164,6 +177,9 @@ Status CarryOver::finish(EventFile& into) {
       lost_.empty() ? first_ : std::min(first_ == 0 ? lost_.front().first : first_, lost_.front().first);
   if (error.ok() && begins != 0) {
     error = into.noteCarried(begins);
+  }
+  for (std::size_t i = 0; error.ok() && i < removed_.size(); ++i) {
+    error = into.noteRemoved(removed_[i]);
   }
   if (error.ok()) {
     error = into.commit();

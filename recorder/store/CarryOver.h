@@ -20,7 +20,8 @@
 #include "recorder/store/EventFile.h"
 #include "recorder/store/EventGroup.h"
 #include "recorder/store/Statement.h"
-#include "recorder/store/StoreCheck.h"
+#include "recorder/store/retention/IdRange.h"
+#include "recorder/store/retention/RemovedIds.h"
 
 namespace tarn::recorder {
 
@@ -68,6 +69,8 @@ class CarryOver {
   void readRow(double now);
   // Those rows in one transaction, and what their ids tell of others that are missing.
   [[nodiscard]] Status writeSome(EventFile& into);
+  // These aren't there: lost, but for those that retention removed.
+  void miss(IdRange gap);
   // The notes, and the ids of the fresh file go on after the old one's.
   [[nodiscard]] Status finish(EventFile& into);
 
@@ -78,11 +81,13 @@ class CarryOver {
   // Both look things up in the old file: rows after an id, and the group in which an id may lie.
   Statement rows_;
   Statement groups_;
+  RemovedIds removedIds_;
   EventGroup group_;
   // Read and not committed yet; kept over a failure of the fresh file.
   std::vector<Read> some_;
   // In rising order, as far as it has come.
   std::vector<IdRange> lost_;
+  std::vector<IdRange> removed_;
   // Of SQLite's machine: a tree that leads into itself ends with these.
   std::int64_t stepsLeft_ = 0;
   // How far it is: opened, however that went, and read to the end.

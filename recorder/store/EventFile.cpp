@@ -230,6 +230,7 @@ Status EventFile::rollbackAfter(int code) {
 
 void EventFile::rollback() {
   connection_.rollback();
+  retention_.rolledBack();
   table_.forget();
   sessions_.rolledBack();
 }
@@ -258,20 +259,11 @@ Status EventFile::append(const StoredEvent& event, bool repeatsPayload, platform
   Status error = rollbackAfter(sessions_.noteEvent(owner, nextId_));
   if (error.failed()) return error;
   error = insertAs(nextId_, owned, repeatsPayload, false);
+  error = error.ok() ? rollbackAfter(retention_.added(nextId_, owned)) : error;
   if (error.ok()) {
     ++nextId_;
   }
   return error;
-}
-
-Status EventFile::carry(std::int64_t id, double seconds, const StoredEvent& event, bool repeatsPayload) {
-  if (id != group_.end() || seconds != group_.seconds()) {
-    if (auto error = rollbackAfter(writeGroup()); error.failed()) return error;
-    group_.begin(id, seconds);
-  }
-  skipTo(id);
-  nextId_ = lastId_ + 1;
-  return insertAs(id, event, repeatsPayload, true);
 }
 
 Status EventFile::insertAs(std::int64_t id, const StoredEvent& event, bool repeatsPayload, bool replacing) {
@@ -294,37 +286,13 @@ int EventFile::writeGroup() {
   return code;
 }
 
-Status EventFile::carrySessions(Connection& from) {
-  return rollbackAfter(SessionTable::carry(from, connection_));
-}
-
-Status EventFile::noteLoss(const IdRange& lost) {
-  Statement insert;
-  int code = insert.prepare(connection_.handle(), "INSERT OR REPLACE INTO recorder_losses VALUES(?1, ?2)");
-  if (code == SQLITE_OK) {
-    code = insert.bind(1, lost.first).bind(2, lost.last).run();
-  }
-  // The next one to open the file must not miss them again.
-  if (code == SQLITE_OK) {
-    code = keepLastId_.bind(1, lastId_).run();
-  }
-  return rollbackAfter(code);
-}
-
-Status EventFile::noteCarried(std::int64_t first) {
-  Statement note;
-  int code = note.prepare(connection_.handle(),
-                          "INSERT OR REPLACE INTO recorder_state "
-                          "VALUES('holds_after', ?1 - 1), ('begun_after', ?2), ('last_id', ?2)");
-  if (code == SQLITE_OK) {
-    code = note.bind(1, first).bind(2, lastId_).run();
-  }
-  return rollbackAfter(code);
-}
-
 Status EventFile::expire(std::chrono::steady_clock::time_point deadline) {
   int code = writeGroup();
   code = code == SQLITE_OK ? retention_.expire(time_.seconds(), nextId_ - 1, deadline, expiring_) : code;
+  // The next events must not name texts that went.
+  if (nextId_ - retention_.removedUpTo() <= EventTable::kPayloadReach) {
+    table_.forget();
+  }
   if (code == SQLITE_OK && expiring_ > 0) {
     code = keepLastId_.bind(1, nextId_ - 1).run();
   }
@@ -354,6 +322,7 @@ Status EventFile::commit() {
     return error;
   }
   sessions_.committed();
+  retention_.committed();
   lastId_ = nextId_ - 1;
   logBytes_ = logPages_ * (pageBytes_ + kFrameHeaderBytes);
   expired_ += std::exchange(expiring_, 0);

@@ -17,6 +17,7 @@
 #include <chrono>
 #include <cstdint>
 #include <filesystem>
+#include <map>
 #include <optional>
 #include <string>
 #include <utility>
@@ -83,6 +84,8 @@ class EventFile {
   [[nodiscard]] Status carry(std::int64_t id, double seconds, const StoredEvent& event, bool repeatsPayload);
   // Notes ids that were committed once and are in no file now, so that nobody looks for them again; in a transaction.
   [[nodiscard]] Status noteLoss(const IdRange& lost);
+  // The same for ids that retention had removed from the middle of another file.
+  [[nodiscard]] Status noteRemoved(const IdRange& removed);
   // What was carried begins with this id, and whoever reads along goes on after the last one. In a transaction, after
   // the last carry().
   [[nodiscard]] Status noteCarried(std::int64_t first);
@@ -125,6 +128,8 @@ class EventFile {
   bool hasMoreToExpire() const noexcept { return retention_.hasMore(); }
   // Events removed by the transactions committed so far, since this was made.
   std::uint64_t expired() const noexcept { return expired_; }
+  // The same by whose they were. Threads: any.
+  std::map<Owner, std::uint64_t> expiredByOwner() const { return retention_.expiredByOwner(); }
 
   // What the database may take, and how large its log grows before it is brought in while commits go on. At twice the
   // size they wait for it. Bytes; from the next expire() and checkpointIfDue() on.

@@ -3,20 +3,50 @@
 #include <sqlite3.h>
 
 #include <algorithm>
-
-#include "recorder/store/EventTable.h"
+#include <limits>
+#include <string>
+#include <utility>
 
 namespace tarn::recorder {
 
 namespace {
 
-// Ids in one deletion, and pages given back in one go: a few milliseconds each.
-constexpr std::int64_t kSliceIds = 256;
+using SteadyClock = std::chrono::steady_clock;
+
+// Events in one step, groups that one looks at, and pages given back in one go: a few milliseconds each.
+constexpr std::int64_t kSliceEvents = 512;
+constexpr int kSliceGroups = 512;
 constexpr std::int64_t kPagesAtOnce = 64;
+// For space so many bytes at least go in one step, as each has to look around.
+constexpr std::int64_t kLeastSliceBytes = std::int64_t{1} << 15;
+constexpr std::int64_t kSliceShare = 512;
+// Rows that are read at once.
+constexpr std::int64_t kRowsAtOnce = 256;
+constexpr std::int64_t kRowsCountedAtOnce = 1024;
 // Deleting begins this much below the limit, so that the next commits find free pages and the file doesn't outgrow it.
 constexpr std::int64_t kReserveShare = 16;
+// From here on it is counted who has how much: early enough to be done in pieces before the limit is reached.
+constexpr std::int64_t kCountingFrom = 3;
+constexpr std::int64_t kOfQuarters = 4;
+// Owners that are counted alone.
+constexpr std::size_t kMostOwners = 256;
+
+constexpr std::int64_t kFirstId = std::numeric_limits<std::int64_t>::min();
+
+constexpr std::size_t indexOf(EventSort sort) noexcept {
+  return static_cast<std::size_t>(sort);
+}
 
 }  // namespace
+
+struct Retention::Line {
+  Owner owner;
+  EventSort sort;
+  std::int64_t from;  // where the rows go on
+  std::vector<ScannedEvent> events;
+  std::size_t at = 0;
+  bool isOver = false;
+};
 
 int Retention::prepare(Connection& connection) {
   connection_ = &connection;
@@ -24,80 +54,210 @@ int Retention::prepare(Connection& connection) {
     Statement& statement;
     const char* sql;
   } all[] = {
-      {oldest_, "SELECT id FROM event_rows ORDER BY id LIMIT 1"},
       {pageCount_, "PRAGMA page_count"},
       {freePages_, "PRAGMA freelist_count"},
-      {groupTimes_, "SELECT first, seconds FROM event_groups ORDER BY first"},
-      {removeBefore_, "DELETE FROM event_rows WHERE id < ?1"},
-      // Texts that a row after them still names stay; such a row isn't far.
-      {removeTexts_,
-       "DELETE FROM event_texts WHERE id < 2 * ?1 AND id NOT IN "
-       "(SELECT 2 * (id - kind) + 1 FROM event_rows WHERE id >= ?1 AND id < ?1 + ?2 AND id - kind < ?1 UNION ALL "
-       "SELECT 2 * (id - payload) FROM event_rows WHERE id >= ?1 AND id < ?1 + ?3 AND id - payload < ?1)"},
-      {removeSpans_, "DELETE FROM session_spans WHERE first <= ?1 - ?2"},
-      {removeTimes_, "DELETE FROM event_times WHERE block < ?1 >> ?2"},
-      // The group in which the bound lies stays.
-      {removeGroups_, "DELETE FROM event_groups WHERE first < (SELECT max(first) FROM event_groups WHERE first <= ?1)"},
-      {removeLosses_, "DELETE FROM recorder_losses WHERE last < ?1"},
-      {keepHoldsAfter_, "INSERT OR REPLACE INTO recorder_state VALUES('holds_after', ?1 - 1)"},
+      {groupTimes_,
+       "SELECT first, seconds FROM event_groups WHERE first >= coalesce((SELECT max(first) FROM event_groups WHERE "
+       "first <= ?1), ?1) ORDER BY first"},
   };
   for (const auto& [statement, sql] : all) {
     if (const int code = statement.prepare(connection.handle(), sql, true); code != SQLITE_OK) return code;
   }
+  int code = scan_.prepare(connection);
+  code = code == SQLITE_OK ? removal_.prepare(connection) : code;
   pageBytes_ = connection.integer("PRAGMA page_size").value_or(4096);
-  return SQLITE_OK;
+  forgetShares();
+  rolledBack();
+  return code;
 }
 
 void Retention::finalize() noexcept {
-  for (Statement* const statement : {&oldest_, &pageCount_, &freePages_, &groupTimes_, &removeBefore_, &removeTexts_,
-                                     &removeSpans_, &removeTimes_, &removeGroups_, &removeLosses_, &keepHoldsAfter_}) {
+  for (Statement* const statement : {&pageCount_, &freePages_, &groupTimes_}) {
     statement->finalize();
   }
+  scan_.finalize();
+  removal_.finalize();
+  forgetShares();
 }
 
-int Retention::readOldest(std::int64_t& id, bool& any) {
-  const int code = oldest_.step();
-  any = code == SQLITE_ROW;
-  if (any) {
-    id = oldest_.integer(0);
+void Retention::forgetShares() noexcept {
+  shares_.clear();
+  count_ = countCommitted_ = Count::None;
+}
+
+void Retention::committed() noexcept {
+  shares_.committed();
+  countCommitted_ = count_;
+  if (expiring_.empty()) return;
+  const MutexLock lock(mutex_);
+  for (const auto& [owner, events] : expiring_) {
+    expired_.find(owner)->second += events;
   }
-  oldest_.reset();
-  return any || code == SQLITE_DONE ? SQLITE_OK : code;
+  expiring_.clear();
 }
 
-// The first id that isn't too old, `atMost` when all before that are; 0 when no group says that anything is.
-int Retention::readAgedBefore(double cutoff, std::int64_t atMost, std::int64_t& before) {
-  before = 0;
-  bool aged = false;
-  int code = groupTimes_.step();
+// What was counted in pieces may have counted what isn't there now.
+void Retention::rolledBack() {
+  if (countCommitted_ == Count::Done) {
+    shares_.rolledBack();
+  } else {
+    forgetShares();
+  }
+  scan_.forget();
+  agedFrom_ = {kFirstId, kFirstId};
+  expiring_.clear();
+}
+
+std::map<Owner, std::uint64_t> Retention::expiredByOwner() const {
+  std::map<Owner, std::uint64_t> expired;
+  const MutexLock lock(mutex_);
+  for (const auto& [owner, events] : expired_) {
+    if (events > 0) {
+      expired.emplace(owner, events);
+    }
+  }
+  return expired;
+}
+
+int Retention::addToShares(std::int64_t id, const StoredEvent& event) {
+  Owner owner = kServiceItself;
+  const int code = scan_.readOwner(event.session, owner);
+  if (code == SQLITE_OK) {
+    shares_.add(owner, sortOf(event.backend, event.name, event.detail), id, countedBytes(event));
+  }
+  return code;
+}
+
+int Retention::goOnCounting(std::int64_t newest, Deadline deadline) {
+  if (count_ == Count::None) {
+    forgetShares();
+    count_ = Count::Begun;
+    countNext_ = kFirstId;
+    countEnd_ = newest + 1;
+  }
+  int code = SQLITE_OK;
+  do {
+    code = scan_.read(countNext_, countEnd_, kRowsCountedAtOnce, scanned_);
+    if (code != SQLITE_OK) break;
+    for (const ScannedEvent& event : scanned_) {
+      shares_.add(event.owner, event.sort, event.id, event.bytes);
+      countNext_ = event.id + 1;
+    }
+    if (static_cast<std::int64_t>(scanned_.size()) < kRowsCountedAtOnce) {
+      count_ = Count::Done;
+    }
+  } while (count_ != Count::Done && SteadyClock::now() < deadline);
+  return code;
+}
+
+// The last groups that are looked at stay for the next look, so that many old ones are no long walk.
+int Retention::readAgedBefore(double cutoff, std::int64_t from, std::int64_t newest, std::int64_t& before) {
+  before = from;
+  std::int64_t end = newest + 1;
+  int code = groupTimes_.bind(1, from).step();
+  int aged = 0;
   for (; code == SQLITE_ROW; code = groupTimes_.step()) {
-    const std::int64_t first = groupTimes_.integer(0);
-    if (first >= atMost) break;
-    if (groupTimes_.real(1) >= cutoff) {
-      atMost = first;
+    if (groupTimes_.real(1) >= cutoff || aged == kSliceGroups) {
+      end = groupTimes_.integer(0);
       break;
     }
-    aged = true;
+    ++aged;
   }
   groupTimes_.reset();
-  if (aged) {
-    before = atMost;
+  if (aged > 0) {
+    before = std::max(from, end);
   }
   return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
 }
 
-int Retention::removeBefore(std::int64_t id, std::uint64_t& removed) {
-  int code = removeBefore_.bind(1, id).run();
+int Retention::pickAged(EventSort sort, double cutoff, std::int64_t newest, bool& more) {
+  std::int64_t& from = agedFrom_[indexOf(sort)];
+  std::int64_t before = from;
+  int code = readAgedBefore(cutoff, from, newest, before);
+  if (code != SQLITE_OK || before <= from) return code;
+  more = true;
+  code = scan_.read(from, before, kSliceEvents, scanned_);
   if (code != SQLITE_OK) return code;
-  removed += static_cast<std::uint64_t>(sqlite3_changes64(connection_->handle()));
-  removeTexts_.bind(2, EventTable::kReach).bind(3, EventTable::kPayloadReach);
-  removeSpans_.bind(2, EventTable::kReach);
-  removeTimes_.bind(2, std::int64_t{EventTable::kBlockBits});
-  for (Statement* const statement :
-       {&removeTexts_, &removeSpans_, &removeTimes_, &removeGroups_, &removeLosses_, &keepHoldsAfter_}) {
-    if (code = statement->bind(1, id).run(); code != SQLITE_OK) return code;
+  from = static_cast<std::int64_t>(scanned_.size()) < kSliceEvents ? before : scanned_.back().id + 1;
+  for (const ScannedEvent& event : scanned_) {
+    if (event.sort != sort) continue;
+    notePicked(event);
+    const bool isCounted = event.id < countNext_ || event.id >= countEnd_;
+    if (count_ == Count::Done || (count_ == Count::Begun && isCounted)) {
+      shares_.remove(event.owner, sort, event.bytes);
+    }
+  }
+  return code;
+}
+
+void Retention::notePicked(const ScannedEvent& event) {
+  picked_.push_back(event.id);
+  Owner owner = event.owner;
+  {
+    const MutexLock lock(mutex_);
+    if (expired_.size() >= kMostOwners && !expired_.contains(owner)) {
+      owner = kOtherOwners;
+    }
+    expired_.try_emplace(owner, 0);
+  }
+  ++expiring_[owner];
+}
+
+int Retention::readNext(Line& line, std::int64_t newest) {
+  while (line.at == line.events.size() && !line.isOver) {
+    if (const int code = scan_.read(line.from, newest + 1, kRowsAtOnce, scanned_); code != SQLITE_OK) return code;
+    line.isOver = static_cast<std::int64_t>(scanned_.size()) < kRowsAtOnce;
+    line.from = scanned_.empty() ? newest + 1 : scanned_.back().id + 1;
+    line.events.clear();
+    line.at = 0;
+    for (const ScannedEvent& event : scanned_) {
+      if (event.owner == line.owner && event.sort == line.sort) {
+        line.events.push_back(event);
+      }
+    }
   }
   return SQLITE_OK;
+}
+
+// At most half of what is there, so that of a few large ones no more go than must.
+int Retention::pickForSpace(std::int64_t newest, std::int64_t excess) {
+  const std::int64_t mostEvents = std::clamp<std::int64_t>(shares_.events() / 2, 1, kSliceEvents);
+  const std::int64_t mostBytes =
+      std::min(shares_.bytes() / 2, std::max({kLeastSliceBytes, limits_.maxBytes / kSliceShare, excess}));
+  std::map<std::pair<Owner, EventSort>, Line> lines;
+  int code = SQLITE_OK;
+  for (std::int64_t events = 0, bytes = 0; events < mostEvents && (events == 0 || bytes < mostBytes); ++events) {
+    if (shares_.empty()) break;
+    const Owner owner = shares_.largest();
+    const EventSort sort = shares_.nextSort(owner);
+    const auto [place, isNew] = lines.try_emplace({owner, sort}, Line{owner, sort, 0, {}});
+    Line& line = place->second;
+    if (isNew) {
+      line.from = shares_.of(owner).from[indexOf(sort)];
+    }
+    if (code = readNext(line, newest); code != SQLITE_OK) return code;
+    if (line.at == line.events.size()) {  // somebody else has changed the file
+      forgetShares();
+      return SQLITE_OK;
+    }
+    const ScannedEvent& event = line.events[line.at++];
+    notePicked(event);
+    shares_.remove(owner, sort, event.bytes);
+    bytes += event.bytes;
+  }
+  for (const auto& [key, line] : lines) {
+    shares_.passed(key.first, key.second, line.at < line.events.size() ? line.events[line.at].id : line.from);
+  }
+  return code;
+}
+
+int Retention::removePicked(std::uint64_t& removed) {
+  if (picked_.empty()) return SQLITE_OK;
+  std::sort(picked_.begin(), picked_.end());
+  const int code = removal_.remove(picked_);
+  removed += picked_.size();
+  removedUpTo_ = std::max(removedUpTo_, picked_.back());
+  return code;
 }
 
 int Retention::readPragma(Statement& pragma, std::int64_t& value) {
@@ -121,28 +281,29 @@ int Retention::readSizes(std::int64_t& fileBytes, std::int64_t& usedBytes) {
   return code;
 }
 
-int Retention::removeSlice(double now, std::int64_t newest, bool& removedAny, std::uint64_t& removed) {
-  removedAny = false;
+int Retention::removeSlice(double now, std::int64_t newest, Deadline deadline, bool& more, std::uint64_t& removed) {
+  more = false;
+  picked_.clear();
+  int code = pickAged(EventSort::Message, now - limits_.maxAgeSeconds, newest, more);
+  if (code == SQLITE_OK && !more) {
+    code = pickAged(EventSort::Summary, now - limits_.summaryMaxAgeSeconds, newest, more);
+  }
+  if (code != SQLITE_OK || more) return code == SQLITE_OK ? removePicked(removed) : code;
+
   std::int64_t fileBytes = 0;
   std::int64_t usedBytes = 0;
-  std::int64_t oldest = 0;
-  bool any = false;
-  int code = readSizes(fileBytes, usedBytes);
-  if (code == SQLITE_OK) {
-    code = readOldest(oldest, any);
+  code = readSizes(fileBytes, usedBytes);
+  const std::int64_t excess = usedBytes - (limits_.maxBytes - limits_.maxBytes / kReserveShare);
+  const bool isNear = usedBytes / kCountingFrom >= limits_.maxBytes / kOfQuarters;
+  if (code == SQLITE_OK && count_ != Count::Done && (isNear || excess > 0)) {
+    code = goOnCounting(newest, excess > 0 ? Deadline::max() : deadline);
+    more = count_ != Count::Done;
   }
-  if (code != SQLITE_OK || !any) return code;
-
-  std::int64_t before = std::min(oldest + kSliceIds, newest + 1);
-  if (usedBytes <= limits_.maxBytes - limits_.maxBytes / kReserveShare) {
-    code = readAgedBefore(now - limits_.maxAgeSeconds, before, before);
-  } else {
-    // Of a few large ones at most half, so that no more go than must.
-    before = std::min(before, oldest + std::max<std::int64_t>((newest - oldest + 1) / 2, 1));
+  if (code == SQLITE_OK && excess > 0) {
+    code = pickForSpace(newest, excess);
+    more = !picked_.empty();
   }
-  if (code != SQLITE_OK || before <= oldest) return code;
-  removedAny = true;
-  return removeBefore(before, removed);
+  return code == SQLITE_OK ? removePicked(removed) : code;
 }
 
 int Retention::giveBackPages(bool& gaveAny) {
@@ -163,16 +324,16 @@ int Retention::giveBackPages(bool& gaveAny) {
   return read;
 }
 
-int Retention::expire(double now, std::int64_t newest, std::chrono::steady_clock::time_point deadline,
-                      std::uint64_t& removed) {
+int Retention::expire(double now, std::int64_t newest, Deadline deadline, std::uint64_t& removed) {
   bool more = true;
   int code = SQLITE_OK;
+  removedUpTo_ = 0;
   do {
-    code = removeSlice(now, newest, more, removed);
+    code = removeSlice(now, newest, deadline, more, removed);
     if (code == SQLITE_OK && !more) {
       code = giveBackPages(more);
     }
-  } while (code == SQLITE_OK && more && std::chrono::steady_clock::now() < deadline);
+  } while (code == SQLITE_OK && more && SteadyClock::now() < deadline);
   hasMore_ = code == SQLITE_OK && more;
   return code;
 }

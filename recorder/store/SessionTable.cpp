@@ -286,22 +286,28 @@ int SessionTable::expire(double seconds, double age, std::int64_t most) {
   if (code != SQLITE_ROW) return code;
   const std::string bound = std::to_string(before.integer(0));
   before.finalize();
-  return connection_->run(
-      ("CREATE TEMP TABLE old_sessions AS SELECT id FROM sessions AS s WHERE id < " + bound +
+  code = connection_->run(
+      ("CREATE TEMP TABLE old_sessions AS SELECT id FROM sessions AS s WHERE id > " + std::to_string(expiredUpTo_) +
+       " AND id < " + bound +
        " AND ended IS NOT NULL AND NOT EXISTS (SELECT 1 FROM session_spans AS p CROSS JOIN event_rows AS r ON r.id >= "
        "p.first AND r.id < p.first + " +
-       std::to_string(EventTable::kReach) +
-       " AND r.session = s.id WHERE p.session = s.id) ORDER BY id LIMIT 256;"
-       "INSERT OR REPLACE INTO recorder_state SELECT 'last_session', max(id) FROM sessions "
-       "WHERE EXISTS (SELECT 1 FROM old_sessions) HAVING max(id) IS NOT NULL;"
-       "INSERT OR REPLACE INTO recorder_state SELECT 'last_period', max(id) FROM periods "
-       "WHERE EXISTS (SELECT 1 FROM old_sessions) HAVING max(id) IS NOT NULL;"
-       "DELETE FROM periods WHERE session IN (SELECT id FROM old_sessions);"
-       "DELETE FROM sessions WHERE id IN (SELECT id FROM old_sessions);"
-       "DELETE FROM session_ages WHERE first < (SELECT max(first) FROM session_ages WHERE first <= "
-       "(SELECT min(id) FROM sessions));"
-       "DROP TABLE old_sessions")
+       std::to_string(EventTable::kReach) + " AND r.session = s.id WHERE p.session = s.id) ORDER BY id LIMIT 256")
           .c_str());
+  if (code != SQLITE_OK) return code;
+  // More of them wait for the next transaction, and those that stay aren't looked at again before.
+  expiredUpTo_ =
+      connection_->integer("SELECT CASE count(*) WHEN 256 THEN max(id) ELSE 0 END FROM old_sessions").value_or(0);
+  expiredAt_ = expiredUpTo_ > 0 ? -1 : seconds;
+  return connection_->run(
+      "INSERT OR REPLACE INTO recorder_state SELECT 'last_session', max(id) FROM sessions "
+      "WHERE EXISTS (SELECT 1 FROM old_sessions) HAVING max(id) IS NOT NULL;"
+      "INSERT OR REPLACE INTO recorder_state SELECT 'last_period', max(id) FROM periods "
+      "WHERE EXISTS (SELECT 1 FROM old_sessions) HAVING max(id) IS NOT NULL;"
+      "DELETE FROM periods WHERE session IN (SELECT id FROM old_sessions);"
+      "DELETE FROM sessions WHERE id IN (SELECT id FROM old_sessions);"
+      "DELETE FROM session_ages WHERE first < (SELECT max(first) FROM session_ages WHERE first <= "
+      "(SELECT min(id) FROM sessions));"
+      "DROP TABLE old_sessions");
 }
 
 }  // namespace tarn::recorder

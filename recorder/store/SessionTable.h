@@ -75,8 +75,8 @@ class SessionTable {
   void rolledBack() noexcept;
 
   // Rows of ended sessions go when they have no events left and are older than `age`, or when there are more than
-  // `most`; 256 at once, and not more often than every ten seconds (on the recorder's own time, which is `seconds`). In
-  // a transaction.
+  // `most`; 256 at once, and not more often than every ten seconds (on the recorder's own time, which is `seconds`),
+  // but for further ones that a look has found. In a transaction.
   [[nodiscard]] int expire(double seconds, double age, std::int64_t most);
 
  private:
@@ -116,8 +116,9 @@ class SessionTable {
   // Of the event before, as most come in a row; no period: it has none that is open.
   platform::SessionNumber lastSession_ = 0;
   Period* lastPeriod_ = nullptr;
-  double agedAt_ = -1;     // when the last age was noted
-  double expiredAt_ = -1;  // when expire() looked last
+  double agedAt_ = -1;            // when the last age was noted
+  double expiredAt_ = -1;         // when expire() looked last
+  std::int64_t expiredUpTo_ = 0;  // where its next look begins
 };
 
 }  // namespace tarn::recorder

@@ -10,7 +10,6 @@ namespace tarn::recorder {
 
 namespace {
 
-constexpr std::size_t kRangesTold = 8;
 // Ids that are passed over where nothing can be read.
 constexpr std::int64_t kStride = 16;
 constexpr int kMostStrides = 1'000'000;
@@ -22,39 +21,6 @@ bool isAsWritten(const Statement& row) noexcept {
 }
 
 }  // namespace
-
-void addRange(std::vector<IdRange>& ranges, IdRange range) {
-  if (!ranges.empty() && range.first <= ranges.back().last + 1) {
-    ranges.back().last = std::max(ranges.back().last, range.last);
-  } else {
-    ranges.push_back(range);
-  }
-}
-
-std::int64_t countOf(const std::vector<IdRange>& ranges) {
-  std::int64_t count = 0;
-  for (const IdRange& range : ranges) {
-    count += range.count();
-  }
-  return count;
-}
-
-std::string textOf(const std::vector<IdRange>& ranges) {
-  std::string text;
-  for (std::size_t i = 0; i < std::min(ranges.size(), kRangesTold); ++i) {
-    if (i > 0) {
-      text += ", ";
-    }
-    text += std::to_string(ranges[i].first);
-    if (ranges[i].last != ranges[i].first) {
-      text += "-" + std::to_string(ranges[i].last);
-    }
-  }
-  if (ranges.size() > kRangesTold) {
-    text += " and " + std::to_string(ranges.size() - kRangesTold) + " more ranges";
-  }
-  return text;
-}
 
 Status StoreCheck::begin() {
   finalize();
@@ -71,6 +37,7 @@ Status StoreCheck::begin() {
     const std::string rows(selectEvents(connection_).sql);
     code = rows_.prepare(connection_.handle(), rows + " WHERE r.id >= ?1 AND r.id < ?2 ORDER BY r.id");
   }
+  removedIds_.prepare(connection_);
   done_ = code != SQLITE_OK;
   return connection_.errorOf(code);
 }
@@ -78,6 +45,7 @@ Status StoreCheck::begin() {
 void StoreCheck::finalize() noexcept {
   groups_.finalize();
   rows_.finalize();
+  removedIds_.finalize();
   done_ = true;
 }
 
@@ -119,25 +87,36 @@ Status StoreCheck::lookAtGroup() {
 // Without a group nothing proves the rows.
 Status StoreCheck::lookAtRows(std::int64_t first, std::int64_t end, const EventGroup* group) {
   int code = SQLITE_ROW;
-  while (first < end) {
+  Status error;
+  while (first < end && error.ok()) {
     code = rows_.bind(1, first).bind(2, end).step();
-    for (; code == SQLITE_ROW; code = rows_.step()) {
+    for (; code == SQLITE_ROW && error.ok(); code = rows_.step()) {
       const std::int64_t id = rows_.integer(0);
       if (id < first || id >= end) break;  // a tree out of order
-      lose(first, id);
+      error = miss(first, id);
       first = id + 1;
       lookAtRow(id, group);
     }
     rows_.reset();
     if (code == SQLITE_DONE || !tolerant_ || --stridesLeft_ < 0) break;
     const std::int64_t next = std::min(first + kStride, end);
-    lose(first, next);
+    error = miss(first, next);
     first = next;
   }
+  if (error.failed()) return error;
   if (!tolerant_ && code != SQLITE_DONE) {
     return code == SQLITE_ROW ? Error{SQLITE_CORRUPT, "damaged: its ids are out of order"} : connection_.errorOf(code);
   }
-  lose(first, end);
+  return miss(first, end);
+}
+
+Status StoreCheck::miss(std::int64_t first, std::int64_t end) {
+  if (first >= end) return {};
+  const int code = removedIds_.within({first, end - 1}, removed_);
+  if (code != SQLITE_OK && !tolerant_) return connection_.errorOf(code);
+  for (const IdRange& gap : without({first, end - 1}, removed_)) {
+    lose(gap.first, gap.last + 1);
+  }
   return {};
 }
 

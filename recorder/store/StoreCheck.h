@@ -1,6 +1,6 @@
 // StoreCheck: compares the recorder's rows with their checksums, group by group, in steps as long as one likes.
 //
-// Every id after those that retention removed is either there and as it was written, or unproven (its row is there, its
+// Every id that retention hasn't removed is either there and as it was written, or unproven (its row is there, its
 // checksum isn't), or lost. Events that were written before there were checksums are taken as they are. Finalized
 // before its connection closes. Threads: the connection's.
 #pragma once
@@ -14,23 +14,10 @@
 #include "recorder/store/Connection.h"
 #include "recorder/store/EventGroup.h"
 #include "recorder/store/Statement.h"
+#include "recorder/store/retention/IdRange.h"
+#include "recorder/store/retention/RemovedIds.h"
 
 namespace tarn::recorder {
-
-// Ids from the first to the last, both included.
-struct IdRange {
-  std::int64_t first = 0;
-  std::int64_t last = 0;
-  std::int64_t count() const noexcept { return last - first + 1; }
-  friend bool operator==(const IdRange&, const IdRange&) = default;
-};
-
-// Adds to ranges that rise, joining neighbours. `range` begins no earlier than the last one.
-void addRange(std::vector<IdRange>& ranges, IdRange range);
-// Ids in all of them.
-std::int64_t countOf(const std::vector<IdRange>& ranges);
-// "3, 5-9 and 2 more ranges": the first eight.
-std::string textOf(const std::vector<IdRange>& ranges);
 
 class StoreCheck {
  public:
@@ -70,6 +57,8 @@ class StoreCheck {
   void lookAtRow(std::int64_t id, const EventGroup* group);
   // The ids after the last group, up to the last that was given.
   [[nodiscard]] Status finish();
+  // These aren't there: lost, but for those that retention removed.
+  [[nodiscard]] Status miss(std::int64_t first, std::int64_t end);
   // Told apart by whether the recorder has noted it.
   void lose(std::int64_t first, std::int64_t end);
 
@@ -77,6 +66,8 @@ class StoreCheck {
   // Groups from an id on, and rows between two ids.
   Statement groups_;
   Statement rows_;
+  RemovedIds removedIds_;
+  std::vector<IdRange> removed_;  // of a gap that is looked at
   // That is looked at.
   EventGroup group_;
   // Where goOn() goes on. Every id from the file's first up to here was looked at.

@@ -1,4 +1,6 @@
 // What the recorder's file goes through: damage, retention, patterns; and that the ledger adds up.
+#include <unistd.h>
+
 #include <csignal>
 #include <filesystem>
 
@@ -54,6 +56,8 @@ TEST_F(RecorderFile, TheOldestEventsGoWhenTheFileGrowsTooLarge) {
   ASSERT_TRUE(client->call(client::getAllReporters()).ok());
   ASSERT_TRUE(eventually([this] { return status().at("recorder_expired") > 0; })) << status().dump();
   const json ledger = ledgerAtRest();
+  const json expected{{std::to_string(::geteuid()), ledger.at("recorder_expired")}};
+  EXPECT_EQ(ledger.at("recorder_expired_by_user"), expected);
   const auto left = events("*.Playback.Start");
   ASSERT_FALSE(left.empty());
   EXPECT_LT(left.size(), 800U);

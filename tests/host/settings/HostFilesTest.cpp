@@ -51,6 +51,7 @@ trace_analysis = "/opt/analysis.so"
 [recorder]
 max_megabytes = 1
 max_age_days = 7
+summary_max_age_days = 14
 [limits]
 max_frame_bytes = 65536
 )",
@@ -69,6 +70,7 @@ max_frame_bytes = 65536
   EXPECT_EQ(host.paths.traceAnalysis, "/opt/analysis.so");
   EXPECT_EQ(host.recorder.maxMegabytes, 1);
   EXPECT_EQ(host.recorder.maxAgeDays, 7);
+  EXPECT_EQ(host.recorder.summaryMaxAgeDays, 14);
   EXPECT_EQ(host.limits.maxFrameBytes, 65536U);
 }
 
@@ -126,6 +128,7 @@ TEST(HostConfiguration, NumbersAreReadToTheirLimitsAndRefusedBehindThem) {
   const std::vector<Range> ranges{{"rtc", "start_delay_ms", 0, 3600000},
                                   {"recorder", "max_megabytes", 1, 1048576},
                                   {"recorder", "max_age_days", 1, 36500},
+                                  {"recorder", "summary_max_age_days", 1, 36500},
                                   {"limits", "max_frame_bytes", 64, 67108864}};
   for (const Range& range : ranges) {
     const auto with = [&](std::int64_t number) {
