@@ -99,6 +99,17 @@ class InstalledTree(unittest.TestCase):
             self.assertIn("u " + service["User"][0] + " ", file.read())
         self.assertEqual(sockets["SocketUser"], service["User"])
 
+    def test_the_adapter_comes_with_its_unit_or_not_at_all(self):
+        program, unit = self.at("bin", "tarnreporting-pipewire"), "lib/systemd/user/tarnreporting-pipewire.service"
+        self.assertEqual(os.path.exists(self.at(unit)), os.path.exists(program))
+        if not os.path.exists(program):
+            return
+        done = run(program, "--help")
+        self.assertEqual((done.returncode, "--print" in done.stdout), (0, True), done.stderr)
+        settings = self.settings(unit)
+        self.assertEqual(shlex.split(settings["ExecStart"][0]), [program])
+        self.assertEqual((settings["BindsTo"], settings["WantedBy"]), (["pipewire.service"], ["pipewire.service"]))
+
     def test_the_installed_configuration_is_read_and_may_be_absent(self):
         path = self.at("etc/tarnreporting/tarnreportingd.toml")
         command = [self.at("bin", "tarnreportingd"), "--state-dir", path + "/none",

@@ -9,11 +9,11 @@ from dataclasses import dataclass
 
 from tree import Finding, code_only, matches
 
-HOST = ("host/*", "recorder/*", "service/main.cpp", "tools/*", "client/*", "clients/*")
+HOST = ("host/*", "recorder/*", "service/main.cpp", "tools/*", "client/*", "clients/*", "adapters/*")
 TRIALS = ("tests/*", "bench/*", "fuzz/*")
 # Where time is the real one: real programs, the real machine's folders, and two adapters that have nothing to wait on.
-REAL_TIME = ("tests/e2e/*", "tests/scenario/*", "tests/host/*", "tests/recorder/*", "tests/client/*",
-             "tests/clients/*", "tests/campaigns/shim/RingPoster.cpp", "clients/c/src/Client.cpp",
+REAL_TIME = ("tests/adapters/*", "tests/e2e/*", "tests/scenario/*", "tests/host/*", "tests/recorder/*",
+             "tests/client/*", "tests/clients/*", "tests/campaigns/shim/RingPoster.cpp", "clients/c/src/Client.cpp",
              "tests/*Stress*", "bench/*", "tools/*", "host/system/FileLock.cpp",
              "recorder/store/reading/EventReader.cpp")
 # A fatal check on our own mistakes, where there is no log yet or no longer.
@@ -64,7 +64,7 @@ BANS = (
     Ban(r"\bstd::(?:cout|cerr|clog|cin)\b", ("service/main.cpp", "tools/*", *TRIALS, "host/*"),
         "the logging helper"),
     Ban(call("printf|fprintf|vprintf|vfprintf|puts|fputs|putchar"),
-        ("service/main.cpp", "tools/*", *TRIALS, "host/*", *LAST_WORDS), "the logging helper"),
+        ("service/main.cpp", "tools/*", *TRIALS, "host/*", "adapters/*", *LAST_WORDS), "the logging helper"),
     Ban(call("sprintf|vsprintf|asprintf|vasprintf"), NOWHERE, "std::to_chars and append, or std::snprintf"),
     Ban(call("strcpy|strcat|strncpy|strtok|gets"), NOWHERE, "std::string, std::string_view"),
     Ban(call("atoi|atol|atoll|atof|strtol|strtoll|strtoul|strtoull|strtod|strtof|sscanf"), NOWHERE, "std::from_chars"),

@@ -10,8 +10,8 @@ import re
 from tree import Finding, code_only
 
 HOME = "service/vocabulary/ProcessState.cpp"
-PRODUCT = ("client/", "clients/", "derived/", "diagnostics/", "dictionary/", "host/", "platform/", "plist/",
-           "recorder/", "service/", "session/", "telemetry/", "testing/", "tools/ctl/", "tools/report/",
+PRODUCT = ("adapters/", "client/", "clients/", "derived/", "diagnostics/", "dictionary/", "host/", "platform/",
+           "plist/", "recorder/", "service/", "session/", "telemetry/", "testing/", "tools/ctl/", "tools/report/",
            "tools/script/", "wire/")
 # (file, variable): why it can't live in the home.
 EXCEPTIONS = {
