@@ -2,6 +2,7 @@
 #include <pipewire/pipewire.h>
 
 #include <cerrno>
+#include <csignal>
 #include <cstdio>
 #include <cstdlib>
 #include <string>
@@ -36,6 +37,15 @@ Result<Rules> rulesOf(const AdapterOptions& options) {
   return rules.error.code() == ENOENT || rules.error.code() == ENOTDIR ? Result<Rules>{} : std::move(rules);
 }
 
+// For the loop to take; before any thread is there that they could go to.
+void blockSignals() {
+  sigset_t signals;
+  ::sigemptyset(&signals);
+  ::sigaddset(&signals, SIGINT);
+  ::sigaddset(&signals, SIGTERM);
+  ::pthread_sigmask(SIG_BLOCK, &signals, nullptr);
+}
+
 int runAdapter(int argumentCount, char** arguments) {
   const AdapterCommand command = parseAdapterCommand(argumentCount, arguments);
   if (command.usage.failed()) return refuse(*command.usage, kExitUsage);
@@ -45,6 +55,7 @@ int runAdapter(int argumentCount, char** arguments) {
   }
   const Result<Rules> rules = rulesOf(*command.options);
   if (rules.failed()) return refuse(*rules.error, kExitConfiguration);
+  blockSignals();
   pw_init(nullptr, nullptr);
   if (std::getenv("PIPEWIRE_DEBUG") == nullptr) {
     pw_log_set_level(SPA_LOG_LEVEL_ERROR);  // it warns of modules and ranks that aren't wanted here

@@ -36,10 +36,6 @@ ROOMS = {
     "clients/ring": (),
     "clients/c/include": (),
     "clients/c/src": ("clients/ring", "clients/c/include"),
-    # What PipeWire knows of streams: a model of it, and what joins it to PipeWire and to the C library.
-    "adapters/pipewire/core": (),
-    "adapters/pipewire/graph": ("adapters/pipewire/core",),
-    "adapters/pipewire": VALUES + ("adapters/pipewire/core", "adapters/pipewire/graph", "host/settings"),
     # What can be said, as data, and the constants that are made of it.
     "dictionary": (),
     "platform": VALUES,
@@ -65,6 +61,10 @@ ROOMS = {
     "host/traces/analysis": BASE,
     "host/traces": GROUND + ("host/traces/analysis", "wire"),
     "host": GROUND + HOST + ("recorder",),
+    # What PipeWire knows of streams: a model of it, and what joins it to PipeWire and to the C library.
+    "adapters/pipewire/core": (),
+    "adapters/pipewire/graph": ("adapters/pipewire/core",),
+    "adapters/pipewire": VALUES + ("adapters/pipewire/core", "adapters/pipewire/graph", "host/settings"),
     "testing/backends": BASE,
     "testing": BASE + ("service/vocabulary", "testing/backends"),
     "tools/script": PROGRAM,

@@ -113,6 +113,17 @@ TEST_F(PipeWireStreams, ARunThatIsOverBeforeAllWasToldIsSaidAllTheSame) {
   EXPECT_TRUE(book.isSettled());
 }
 
+TEST_F(PipeWireStreams, ARunThatPausesBeforeAllWasToldIsSaidAllTheSame) {
+  addPlayer(at(10));
+  book.take();
+  book.nodeKnown(kPlayer, at(11), nodeOf(NodeState::Running, playerProperties()));
+  book.nodeKnown(kPlayer, at(11.5), nodeOf(NodeState::Idle, playerProperties()));
+  const auto posts = said();
+  ASSERT_EQ(namesOf(posts), (Names{"Playback Start", "Playback Stop"}));
+  EXPECT_EQ(posts[0].stamp, at(11));
+  EXPECT_EQ(posts[1].stamp, at(11.5));
+}
+
 TEST_F(PipeWireStreams, APauseBetweenTwoLooksIsNotLost) {
   addPlayer(at(10));
   run(at(11));

@@ -1,0 +1,103 @@
+// A program whose streams come and go as fast as they can, each once sound has flowed in it.
+//
+//   churner SECONDS
+//
+// It prints how many there were.
+#include <pipewire/pipewire.h>
+#include <spa/param/audio/format-utils.h>
+
+#include <array>
+#include <cstdio>
+#include <cstdlib>
+#include <string>
+
+namespace {
+
+constexpr std::size_t kAtOnce = 8;
+
+struct Churner;
+
+struct Slot {
+  Churner* churner = nullptr;
+  pw_stream* stream = nullptr;
+  spa_hook hook{};
+  bool isOver = false;
+};
+
+struct Churner {
+  pw_main_loop* loop = nullptr;
+  pw_core* core = nullptr;
+  spa_source* turn = nullptr;
+  std::array<Slot, kAtOnce> slots;
+  unsigned long started = 0;
+  unsigned long over = 0;
+};
+
+void stateChanged(void* data, pw_stream_state, pw_stream_state state, const char*) {
+  auto& slot = *static_cast<Slot*>(data);
+  if (state != PW_STREAM_STATE_STREAMING || slot.isOver) return;
+  slot.isOver = true;
+  pw_loop_signal_event(pw_main_loop_get_loop(slot.churner->loop), slot.churner->turn);
+}
+
+void begin(Churner& churner, Slot& slot) {
+  static constexpr pw_stream_events kEvents{.version = PW_VERSION_STREAM_EVENTS, .state_changed = &stateChanged};
+  std::array<std::uint8_t, 1024> room{};
+  spa_pod_builder builder{};
+  spa_pod_builder_init(&builder, room.data(), static_cast<std::uint32_t>(room.size()));
+  spa_audio_info_raw format{};
+  format.format = SPA_AUDIO_FORMAT_F32;
+  format.rate = 48000;
+  format.channels = 1;
+  format.position[0] = SPA_AUDIO_CHANNEL_MONO;
+  const spa_pod* params[] = {spa_format_audio_raw_build(&builder, SPA_PARAM_EnumFormat, &format)};
+  const std::string name = "churn" + std::to_string(churner.started++);
+  slot.isOver = false;
+  slot.stream = pw_stream_new(churner.core, name.c_str(),
+                              pw_properties_new(PW_KEY_MEDIA_TYPE, "Audio", PW_KEY_MEDIA_CATEGORY, "Playback",
+                                                PW_KEY_MEDIA_ROLE, "Game", PW_KEY_APP_ID, "org.test.churn", nullptr));
+  pw_stream_add_listener(slot.stream, &slot.hook, &kEvents, &slot);
+  pw_stream_connect(slot.stream, PW_DIRECTION_OUTPUT, PW_ID_ANY,
+                    static_cast<pw_stream_flags>(PW_STREAM_FLAG_AUTOCONNECT | PW_STREAM_FLAG_MAP_BUFFERS), params, 1);
+}
+
+void turn(void* data, std::uint64_t) {
+  auto& churner = *static_cast<Churner*>(data);
+  for (Slot& slot : churner.slots) {
+    if (!slot.isOver) continue;
+    pw_stream_destroy(slot.stream);
+    ++churner.over;
+    begin(churner, slot);
+  }
+}
+
+void end(void* data, std::uint64_t) {
+  pw_main_loop_quit(static_cast<Churner*>(data)->loop);
+}
+
+}  // namespace
+
+int main(int count, char** words) {
+  if (count != 2) return 64;
+  pw_init(nullptr, nullptr);
+  Churner churner;
+  churner.loop = pw_main_loop_new(nullptr);
+  pw_loop* const loop = pw_main_loop_get_loop(churner.loop);
+  pw_context* const context = pw_context_new(loop, nullptr, 0);
+  churner.core = pw_context_connect(context, nullptr, 0);
+  if (churner.core == nullptr) return 1;
+  churner.turn = pw_loop_add_event(loop, &turn, &churner);
+  for (Slot& slot : churner.slots) {
+    slot.churner = &churner;
+    begin(churner, slot);
+  }
+  spa_source* const timer = pw_loop_add_timer(loop, &end, &churner);
+  timespec due{std::stol(words[1]), 0};
+  pw_loop_update_timer(loop, timer, &due, nullptr, false);
+  pw_main_loop_run(churner.loop);
+  std::printf("%lu\n", churner.over);
+  pw_context_destroy(context);
+  pw_main_loop_destroy(churner.loop);
+  pw_deinit();
+  return 0;
+}
