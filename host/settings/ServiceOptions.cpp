@@ -58,7 +58,8 @@ void addOptions(CLI::App& app, RawOptions& raw) {
       ->type_name("FILE")
       ->check(checkNotEmpty);
   app.add_option("--device-properties", raw.devicePropertiesFile,
-                 R"(What the device is, JSON (default: none, which is {"InternalBuild": false, "haptics": false}))")
+                 "What the device is, JSON (default: the installed tarnreporting/device.json, if there is one, else "
+                 R"({"InternalBuild": false, "haptics": false}))")
       ->type_name("FILE")
       ->check(checkNotEmpty);
   app.add_option("--log-level", raw.logLevel,
@@ -110,6 +111,7 @@ ServiceCommand parseServiceCommand(int argumentCount, const char* const* argumen
   options.configurationFile = orNothing(raw.configurationFile);
   options.defaultConfigurationFile = defaultConfigurationFile(environment);
   options.devicePropertiesFile = orNothing(raw.devicePropertiesFile);
+  options.defaultDevicePropertiesFile = defaultDevicePropertiesFile(environment);
   options.logLevel = *logLevelFromName(raw.logLevel);
   options.logTarget = raw.logTarget;
   return {std::move(options), {}, {}};

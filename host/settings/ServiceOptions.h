@@ -27,9 +27,10 @@ struct ServiceOptions {
   std::string stateDirectory;
   // One that is named must be there.
   std::optional<std::string> configurationFile;
-  std::string defaultConfigurationFile;  // read when none is named and it is there
-  // Nothing: the device has neither of the known properties.
+  std::string defaultConfigurationFile;  // read when none is named, as far as it is there
+  // Likewise; without any file the device has neither of the known properties.
   std::optional<std::string> devicePropertiesFile;
+  std::string defaultDevicePropertiesFile;
   // What is logged, from this level on, and where: "stderr", "journal" or a file's path.
   platform::LogLevel logLevel = platform::LogLevel::Default;
   std::string logTarget = "stderr";

@@ -43,6 +43,13 @@ TEST(HostPaths, ConfigurationIsThatOfTheProgramsInstallation) {
   EXPECT_EQ(of(""), "");
 }
 
+TEST(HostPaths, DevicePropertiesLieBesideTheConfiguration) {
+  HostEnvironment installed = kUser;
+  installed.program = "/usr/bin/tarnreportingd";
+  EXPECT_EQ(defaultDevicePropertiesFile(installed), "/etc/tarnreporting/device.json");
+  EXPECT_EQ(defaultDevicePropertiesFile(HostEnvironment{}), "");
+}
+
 TEST(HostPaths, ClientsLookAtTheNamedSocketElseTheUsersThenTheSystems) {
   using Paths = std::vector<std::string>;
   HostEnvironment environment = kUser;
