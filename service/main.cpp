@@ -21,6 +21,7 @@
 #include "host/settings/HostPaths.h"
 #include "host/settings/ServiceOptions.h"
 #include "host/system/Heap.h"
+#include "host/system/ProgramVersion.h"
 #include "service/TarnReportingService.h"
 #include "service/TarnReportingWorkerClasses.h"
 #include "service/vocabulary/ProcessState.h"
@@ -118,7 +119,9 @@ int serve(LinuxPlatform& platform, HostSetup& setup) {
 // The exit status.
 int run(int argumentCount, char** arguments) {
   shapeHeap();
-  const ServiceCommand command = parseServiceCommand(argumentCount, arguments, HostEnvironment::current());
+  const ServiceCommand command =
+      parseServiceCommand(argumentCount, arguments, HostEnvironment::current(),
+                          programVersion("tarnreportingd", programCommit(), buildIdentifier()));
   std::cout << command.output << std::flush;
   if (command.usage.failed()) return refuse(command.usage->text, command.usage->code);
   if (!command.options) return kExitSuccess;
