@@ -37,6 +37,8 @@ if(TARN_HARDENING AND NOT (TARN_SANITIZE OR TARN_COVERAGE OR TARN_FUZZ))
     add_compile_options(-U_FORTIFY_SOURCE -D_FORTIFY_SOURCE=3)
   endif()
 endif()
+# By which a program, its debug symbols and a crash's memory are matched; the same for the same code.
+add_link_options(-Wl,--build-id=sha1)
 # Nobody's folders in what is built: it is the same wherever the source lies.
 add_compile_options("-ffile-prefix-map=${PROJECT_SOURCE_DIR}=.")
 

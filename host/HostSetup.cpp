@@ -1,7 +1,6 @@
 #include "host/HostSetup.h"
 
 #include <sys/stat.h>
-#include <unistd.h>
 
 #include <cerrno>
 #include <chrono>
@@ -30,11 +29,6 @@ Result<ListenSocket> openSocket(const ServiceOptions& options) {
     static_cast<void>(createDirectories(folder, 0750));  // binding tells when it failed
   }
   return ListenSocket::claim(*options.socketPath);
-}
-
-// Also when it only can't be told: reading it says what is wrong.
-bool isThere(const std::string& path) {
-  return !path.empty() && (::access(path.c_str(), F_OK) == 0 || (errno != ENOENT && errno != ENOTDIR));
 }
 
 }  // namespace
@@ -67,12 +61,17 @@ void HostSetup::settleLog() {
 
 Status HostSetup::readSettings(const ServiceOptions& options) {
   // One that is named must be there; the installed one may be absent.
-  if (const auto& file = options.configurationFile; file || isThere(options.defaultConfigurationFile)) {
-    Result<HostConfiguration> read = readConfiguration(file.value_or(options.defaultConfigurationFile));
+  const auto& named = options.configurationFile;
+  if (const std::string& file = named ? *named : options.defaultConfigurationFile; !file.empty()) {
+    Result<HostConfiguration> read = readConfigurationWithDropIns(file, !named);
     if (read.failed()) return std::move(read.error);
     configuration = std::move(read.value);
   }
-  return options.devicePropertiesFile ? deviceProperties.load(*options.devicePropertiesFile) : Status();
+  if (options.devicePropertiesFile) return deviceProperties.load(*options.devicePropertiesFile);
+  if (options.defaultDevicePropertiesFile.empty()) return {};
+  Status loaded = deviceProperties.load(options.defaultDevicePropertiesFile);
+  const bool isAbsent = loaded.failed() && (loaded->code == ENOENT || loaded->code == ENOTDIR);
+  return isAbsent ? Status() : std::move(loaded);
 }
 
 }  // namespace tarn::linux_host

@@ -48,7 +48,7 @@ class HostSetup {
   std::unique_ptr<LogFloodGuard> log;
 
  private:
-  // A configuration that is named must be there; the installed one may be absent.
+  // With its drop-ins. A file that is named must be there; the installed ones may be absent.
   Status readSettings(const ServiceOptions& options);
 
   // Held for the life of the process.

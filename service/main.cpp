@@ -19,6 +19,7 @@
 #include "host/settings/HostPaths.h"
 #include "host/settings/ServiceOptions.h"
 #include "host/system/Heap.h"
+#include "host/system/ProgramVersion.h"
 #include "host/system/StartWithoutMemory.h"
 #include "service/TarnReportingService.h"
 #include "service/TarnReportingWorkerClasses.h"
@@ -84,17 +85,16 @@ int serve(LinuxPlatform& platform, HostSetup& setup) {
   return kExitSuccess;
 }
 
-// The exit status.
 int run(int argumentCount, char** arguments) {
   shapeHeap();
-  const ServiceCommand command = parseServiceCommand(argumentCount, arguments, HostEnvironment::current());
+  const ServiceCommand command =
+      parseServiceCommand(argumentCount, arguments, HostEnvironment::current(), versionOf("tarnreportingd"));
   std::cout << command.output << std::flush;
   if (command.usage.failed()) return refuse(command.usage->text, command.usage->code);
   if (!command.options) return kExitSuccess;
   HostSetup setup;
-  if (const Status prepared = setup.prepare(*command.options); prepared.failed()) {
-    return refuse(prepared->text, prepared->code);
-  }
+  const Status prepared = setup.prepare(*command.options);
+  if (prepared.failed()) return refuse(prepared->text, prepared->code);
   ServiceManager serviceManager;
   LinuxPlatform platform(setup.configuration, command.options->stateDirectory, setup.deviceProperties,
                          {setup.clock, *setup.log, serviceManager, [&setup] { setup.settleLog(); }});

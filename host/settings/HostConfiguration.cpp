@@ -1,9 +1,13 @@
 #include "host/settings/HostConfiguration.h"
 
+#include <unistd.h>
+
 #include <algorithm>
 #include <array>
+#include <cerrno>
 
 #include "host/settings/TomlParser.h"
+#include "host/system/FolderNames.h"
 #include "host/system/SmallFile.h"
 #include "host/system/SystemError.h"
 #include "plist/EscapedText.h"
@@ -13,6 +17,7 @@ namespace tarn::linux_host {
 namespace {
 
 constexpr std::size_t kMaximumFileBytes = std::size_t{1} << 20U;
+constexpr std::size_t kMostDropIns = 256;
 
 // What is wrong with a setting, to stand after its name.
 Error wrong(std::string text) {
@@ -35,8 +40,10 @@ Status take(const toml::node& node, std::optional<platform::SnareReason>& reason
   constexpr auto& kNames = platform::kSnareReasonNames;
   std::string name;
   if (Status taken = take(node, name); taken.failed()) return taken;
+  reason.reset();
+  if (name.empty()) return {};
   const auto* const found = std::find(kNames.begin(), kNames.end(), name);
-  if (found == kNames.end()) return name.empty() ? Status() : wrong("must be the name of a reason code, or empty");
+  if (found == kNames.end()) return wrong("must be the name of a reason code, or empty");
   reason = static_cast<platform::SnareReason>(found - kNames.begin());
   return {};
 }
@@ -182,6 +189,8 @@ struct Fault {
 // the file.
 class Reader {
  public:
+  explicit Reader(const HostConfiguration& base) : configuration(base) {}
+
   HostConfiguration configuration;
 
   void readRoot(const toml::table& root) {
@@ -225,14 +234,38 @@ class Reader {
   Fault fault_;
 };
 
+bool isDropIn(std::string_view name) {
+  return !name.starts_with('.') && name.ends_with(".toml");
+}
+
+// Their paths, in order; none where there is no such folder.
+Result<std::vector<std::string>> dropInsOf(const std::string& path) {
+  const std::string folder = path + ".d";
+  const Result<FolderNames> listed = folderNames(folder, kMostDropIns, isDropIn);
+  if (listed.failed() && listed.error->code == ENOENT) return {};
+  if (listed.failed()) return {{}, errorOf(folder, *listed.error)};
+  if (!listed.value.complete) return {{}, Error{0, folder + ": too many files"}};
+  std::vector<std::string> paths;
+  for (const std::string& name : listed.value.names) {
+    paths.push_back(folder + "/" + name);
+  }
+  return {std::move(paths), {}};
+}
+
+// Also when it only can't be told: reading it says what is wrong.
+bool isThere(const std::string& path) {
+  return ::access(path.c_str(), F_OK) == 0 || (errno != ENOENT && errno != ENOTDIR);
+}
+
 }  // namespace
 
-Result<HostConfiguration> parseConfiguration(std::string_view text, std::string_view name) {
+Result<HostConfiguration> parseConfiguration(std::string_view text, std::string_view name,
+                                             const HostConfiguration& base) {
   const toml::parse_result parsed = toml::parse(text);
   Fault fault;
   HostConfiguration configuration;
   if (parsed) {
-    Reader reader;
+    Reader reader(base);
     reader.readRoot(parsed.table());
     fault = reader.fault();
     configuration = std::move(reader.configuration);
@@ -245,10 +278,24 @@ Result<HostConfiguration> parseConfiguration(std::string_view text, std::string_
   return {{}, Error{0, std::move(error)}};
 }
 
-Result<HostConfiguration> readConfiguration(const std::string& path) {
+Result<HostConfiguration> readConfiguration(const std::string& path, const HostConfiguration& base) {
   const auto file = readSmallFile(path, kMaximumFileBytes);
   if (file.failed()) return {{}, errorOf(path, *file.error)};
-  return parseConfiguration(file.value, path);
+  return parseConfiguration(file.value, path, base);
+}
+
+Result<HostConfiguration> readConfigurationWithDropIns(const std::string& path, bool mayBeAbsent) {
+  Result<std::vector<std::string>> files = dropInsOf(path);
+  if (files.failed()) return {{}, std::move(files.error)};
+  if (!mayBeAbsent || isThere(path)) {
+    files.value.insert(files.value.begin(), path);
+  }
+  Result<HostConfiguration> read;
+  for (const std::string& file : files.value) {
+    read = readConfiguration(file, read.value);
+    if (read.failed()) return {{}, std::move(read.error)};
+  }
+  return read;
 }
 
 }  // namespace tarn::linux_host

@@ -56,9 +56,16 @@ struct HostConfiguration {
 // Reads the file; at most 1 MiB. An error reads "NAME:LINE: what is wrong", in one line whatever the file holds, and is
 // the one that stands first in the file; or "NAME: why it can't be read". Then the defaults stand beside it. A file
 // that isn't there is such an error: who may do without one asks first.
-Result<HostConfiguration> readConfiguration(const std::string& path);
+// `base` is what holds where the file says nothing.
+Result<HostConfiguration> readConfiguration(const std::string& path, const HostConfiguration& base = {});
 // The same of a text that is in memory; `name` stands for the file in errors. No file is looked at, nor are those that
 // settings name.
-Result<HostConfiguration> parseConfiguration(std::string_view text, std::string_view name);
+Result<HostConfiguration> parseConfiguration(std::string_view text, std::string_view name,
+                                             const HostConfiguration& base = {});
+// The file and its drop-ins: the files PATH.d/*.toml in the order of their names' bytes, of which each has the last
+// word over those before it, setting by setting. Names that begin with a dot are passed over. `mayBeAbsent`: without
+// the file its drop-ins stand on the defaults; without both the defaults hold. One error anywhere, an unreadable folder
+// or more than 256 drop-ins included, and nothing is taken.
+Result<HostConfiguration> readConfigurationWithDropIns(const std::string& path, bool mayBeAbsent);
 
 }  // namespace tarn::linux_host

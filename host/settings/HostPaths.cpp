@@ -54,6 +54,11 @@ std::string defaultConfigurationFile(const HostEnvironment& environment) {
   return place + "/tarnreporting/tarnreportingd.toml";
 }
 
+std::string defaultDevicePropertiesFile(const HostEnvironment& environment) {
+  const std::string configuration = defaultConfigurationFile(environment);
+  return configuration.empty() ? std::string() : configuration.substr(0, configuration.rfind('/')) + "/device.json";
+}
+
 std::optional<std::string> defaultStateDirectory(const HostEnvironment& environment) {
   if (environment.isRoot) return "/var/lib/tarnreporting";
   if (counts(environment.stateHome)) return environment.stateHome + "/tarnreporting";

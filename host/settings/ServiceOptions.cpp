@@ -11,7 +11,6 @@ namespace tarn::linux_host {
 namespace {
 
 constexpr const char* kProgram = "tarnreportingd";
-constexpr const char* kVersion = "tarnreportingd " TARN_VERSION;
 constexpr const char* kPurpose = "Gathers audio analytics: serves reporting sessions to the clients that connect.";
 constexpr const char* kFooter =
     "The listener is the socket that the service manager hands over (LISTEN_FDS), else --socket. SIGTERM and SIGINT "
@@ -24,15 +23,6 @@ constexpr const char* kFooter =
     "usage;\n"
     "78 for a wrong configuration or device-properties file.";
 
-struct RawOptions {
-  std::string socketPath;
-  std::string stateDirectory;
-  std::string configurationFile;
-  std::string devicePropertiesFile;
-  std::string logLevel = "default";
-  std::string logTarget = "stderr";
-};
-
 std::string checkNotEmpty(const std::string& text) {
   return text.empty() ? "must not be empty" : "";
 }
@@ -41,7 +31,7 @@ std::string checkLevel(const std::string& name) {
   return logLevelFromName(name) ? "" : "\"" + name + "\" is none of debug, info, default, error";
 }
 
-void addOptions(CLI::App& app, RawOptions& raw) {
+void addOptions(CLI::App& app, ServiceOptionTexts& raw) {
   app.add_option("--socket", raw.socketPath,
                  "Socket to listen on (default: $XDG_RUNTIME_DIR/tarnreporting.sock, for root "
                  "/run/tarnreporting/socket)")
@@ -58,7 +48,8 @@ void addOptions(CLI::App& app, RawOptions& raw) {
       ->type_name("FILE")
       ->check(checkNotEmpty);
   app.add_option("--device-properties", raw.devicePropertiesFile,
-                 R"(What the device is, JSON (default: none, which is {"InternalBuild": false, "haptics": false}))")
+                 "What the device is, JSON (default: the installed tarnreporting/device.json, if there is one, else "
+                 R"({"InternalBuild": false, "haptics": false}))")
       ->type_name("FILE")
       ->check(checkNotEmpty);
   app.add_option("--log-level", raw.logLevel,
@@ -82,21 +73,27 @@ std::optional<std::string> orNothing(const std::string& text) {
 
 }  // namespace
 
-ServiceCommand parseServiceCommand(int argumentCount, const char* const* arguments,
-                                   const HostEnvironment& environment) {
-  CLI::App app(kPurpose, kProgram);
-  RawOptions raw;
-  addOptions(app, raw);
+void describeServiceCommand(CLI::App& app, ServiceOptionTexts& texts, const std::string& version) {
+  app.name(kProgram);
+  app.description(kPurpose);
+  addOptions(app, texts);
   app.set_help_flag("--help", "Print this help and exit");
-  app.set_version_flag("--version", kVersion, "Print the version and exit");
+  app.set_version_flag("--version", version, "Print the version and exit");
   app.footer(kFooter);
   app.get_formatter()->column_width(38);
+}
+
+ServiceCommand parseServiceCommand(int argumentCount, const char* const* arguments, const HostEnvironment& environment,
+                                   const std::string& version) {
+  CLI::App app;
+  ServiceOptionTexts raw;
+  describeServiceCommand(app, raw, version);
   try {
     app.parse(argumentCount, arguments);
   } catch (const CLI::CallForHelp&) {
     return {std::nullopt, app.help(), {}};
   } catch (const CLI::CallForVersion&) {
-    return {std::nullopt, std::string(kVersion) + "\n", {}};
+    return {std::nullopt, version + "\n", {}};
   } catch (const CLI::ParseError& fault) {
     return refuse(fault.what());
   }
@@ -110,6 +107,7 @@ ServiceCommand parseServiceCommand(int argumentCount, const char* const* argumen
   options.configurationFile = orNothing(raw.configurationFile);
   options.defaultConfigurationFile = defaultConfigurationFile(environment);
   options.devicePropertiesFile = orNothing(raw.devicePropertiesFile);
+  options.defaultDevicePropertiesFile = defaultDevicePropertiesFile(environment);
   options.logLevel = *logLevelFromName(raw.logLevel);
   options.logTarget = raw.logTarget;
   return {std::move(options), {}, {}};

@@ -10,6 +10,10 @@
 #include "platform/Log.h"
 #include "plist/Result.h"
 
+namespace CLI {
+class App;
+}
+
 namespace tarn::linux_host {
 
 // Exit statuses of the service, which packages and the service manager rely on; 64 and 78 are those of sysexits.h.
@@ -27,9 +31,10 @@ struct ServiceOptions {
   std::string stateDirectory;
   // One that is named must be there.
   std::optional<std::string> configurationFile;
-  std::string defaultConfigurationFile;  // read when none is named and it is there
-  // Nothing: the device has neither of the known properties.
+  std::string defaultConfigurationFile;  // read when none is named, as far as it is there
+  // Likewise; without any file the device has neither of the known properties.
   std::optional<std::string> devicePropertiesFile;
+  std::string defaultDevicePropertiesFile;
   // What is logged, from this level on, and where: "stderr", "journal" or a file's path.
   platform::LogLevel logLevel = platform::LogLevel::Default;
   std::string logTarget = "stderr";
@@ -42,8 +47,22 @@ struct ServiceCommand {
   Status usage;                           // wrong: the code is the exit status, the text names the option
 };
 
+// The options' values as they were written; empty: not given.
+struct ServiceOptionTexts {
+  std::string socketPath;
+  std::string stateDirectory;
+  std::string configurationFile;
+  std::string devicePropertiesFile;
+  std::string logLevel = "default";
+  std::string logTarget = "stderr";
+};
+
+// Puts the whole command line into `app`: what parses it here, and what manual pages and completions are made of.
+// `texts` outlives `app`; `version` is what --version tells.
+void describeServiceCommand(CLI::App& app, ServiceOptionTexts& texts, const std::string& version);
 // Reads `arguments` as main() gets them, the program's name first. An option given with an empty value and one that
 // isn't known are wrong usage: the status is 64 and the text one line.
-ServiceCommand parseServiceCommand(int argumentCount, const char* const* arguments, const HostEnvironment& environment);
+ServiceCommand parseServiceCommand(int argumentCount, const char* const* arguments, const HostEnvironment& environment,
+                                   const std::string& version);
 
 }  // namespace tarn::linux_host

@@ -36,12 +36,13 @@ for word; do
 done
 exec "{ctl}" --state-dir "{folder}" "$@"
 """
-SCRIPT = """{"op": "createReportingSession", "reporterID": 42}
-{"op": "setServiceType", "serviceType": "longformaudio", "reporterID": 42}
-{"op": "startReportingSessionForID", "reporterID": 42}
+# Examples look at session 12.
+SCRIPT = "".join("""{"op": "createReportingSession", "reporterID": %d}
+{"op": "setServiceType", "serviceType": "longformaudio", "reporterID": %d}
+{"op": "startReportingSessionForID", "reporterID": %d}
 {"op": "sendMessage", "message": {"issue_type": "overload"}, "category": "IO", "type": "IssueDetector"}
-{"op": "stopReportingSessionForID", "reporterID": 42}
-"""
+{"op": "stopReportingSessionForID", "reporterID": %d}
+""".replace("%d", str(number)) for number in range(31, 43))
 
 
 def blocks(text):
@@ -79,6 +80,8 @@ def prepare(folder, build):
         with open(os.path.join(folder, path), "w", encoding="utf-8") as file:
             file.write(content)
         os.chmod(os.path.join(folder, path), 0o755)
+    with open(os.path.join(folder, "player.jsonl"), "w", encoding="utf-8") as file:
+        file.write(SCRIPT)
     environment = {**os.environ, "TARNREPORTING_SOCKET": folder + "/socket", "HOME": folder, "TMPDIR": folder,
                    "XDG_STATE_HOME": folder + "/home", "PATH": folder + "/bin:" + os.environ["PATH"]}
     service = subprocess.Popen([build + "/bin/tarnreportingd", "--socket", folder + "/socket", "--state-dir", folder],

@@ -57,6 +57,18 @@ TEST_F(HostSetupTest, InstalledConfigurationIsReadWhenNoneIsNamedAndMayBeAbsent)
   EXPECT_EQ(statusOf(installed, ""), 0);
 }
 
+TEST_F(HostSetupTest, DropInsAreReadOfWhicheverConfigurationIsUsed) {
+  folder_.write("installed.toml.d/a.toml", "[wrong]\n");
+  folder_.write("named.toml", "");
+  folder_.write("named.toml.d/b.toml", "[recorder]\nmax_age_days = 3\n");
+  ServiceOptions installed = options();
+  installed.defaultConfigurationFile = folder_.path("installed.toml");
+  EXPECT_EQ(statusOf(installed, folder_.path("installed.toml.d/a.toml") + ":1: unknown section [wrong]"),
+            kExitConfiguration);
+  installed.configurationFile = folder_.path("named.toml");
+  EXPECT_EQ(statusOf(installed, ""), 0);
+}
+
 TEST_F(HostSetupTest, WhatIsMadeIsForUserAndGroupAlone) {
   const int status = testing::inChild([&] {
     ::umask(0);
@@ -83,6 +95,18 @@ TEST_F(HostSetupTest, BadDevicePropertiesAreRefusedAsConfiguration) {
   ServiceOptions bad = options();
   bad.devicePropertiesFile = folder_.path("none");
   EXPECT_EQ(statusOf(bad, folder_.path("none") + ": No such file or directory"), kExitConfiguration);
+}
+
+TEST_F(HostSetupTest, InstalledDevicePropertiesAreReadWhenNoneAreNamedAndMayBeAbsent) {
+  ServiceOptions installed = options();
+  installed.defaultDevicePropertiesFile = folder_.path("device.json");
+  EXPECT_EQ(statusOf(installed, ""), 0);
+  folder_.write("device.json", "[]");
+  EXPECT_EQ(statusOf(installed, folder_.path("device.json") + ":1:1: device properties are one JSON object"),
+            kExitConfiguration);
+  folder_.write("named.json", "{}");
+  installed.devicePropertiesFile = folder_.path("named.json");
+  EXPECT_EQ(statusOf(installed, ""), 0);
 }
 
 TEST_F(HostSetupTest, NoSocketIsRefused) {

@@ -2,6 +2,7 @@
 
 import argparse
 import os
+import re
 import shlex
 import shutil
 import socket
@@ -13,6 +14,9 @@ import unittest
 PROGRAMS = ("tarnreportingd", "tarnreportingctl")
 FILES = (
     "lib/systemd/system/tarnreportingd.service", "lib/systemd/system/tarnreportingd.socket",
+    "lib/systemd/user/tarnreportingd.service", "lib/systemd/user/tarnreportingd.socket",
+    "share/bash-completion/completions/tarnreportingd", "share/zsh/site-functions/_tarnreportingctl",
+    "share/fish/vendor_completions.d/tarnreportingctl.fish",
     "lib/sysusers.d/tarnreporting.conf", "lib/tmpfiles.d/tarnreporting.conf",
     "etc/tarnreporting/tarnreportingd.toml",
     "lib/tarnkit/traceanalysis.so", "share/doc/tarnkit/LICENSE", "share/doc/tarnkit/README.md",
@@ -133,6 +137,37 @@ class InstalledTree(unittest.TestCase):
         for bound in ("MemoryMax", "TasksMax", "LimitNOFILE"):
             self.assertRegex(service[bound][0], r"^[1-9][0-9]*[MG]?$")
         self.assertEqual(service["UMask"], ["0027"])
+
+    @unittest.skipUnless(shutil.which("systemd-analyze"), "systemd-analyze is not installed here")
+    def test_the_manager_has_nothing_to_say_about_the_units(self):
+        units = [self.at("lib/systemd/system/tarnreportingd." + kind) for kind in ("service", "socket")]
+        done = run("systemd-analyze", "verify", "--man=no", *units)
+        self.assertEqual((done.returncode, done.stdout, done.stderr), (0, "", ""))
+
+    @unittest.skipUnless(shutil.which("systemd-analyze"), "systemd-analyze is not installed here")
+    def test_the_service_is_exposed_as_little_as_it_can_be(self):
+        done = run("systemd-analyze", "security", "--offline=true", "--threshold=7", "--no-pager",
+                   self.at("lib/systemd/system/tarnreportingd.service"))
+        self.assertEqual(done.returncode, 0, done.stdout)
+
+    def test_a_users_own_service_is_where_that_users_clients_look(self):
+        sockets = self.settings("lib/systemd/user/tarnreportingd.socket")
+        self.assertEqual((sockets["ListenStream"], sockets["SocketMode"]), (["%t/tarnreporting.sock"], ["0600"]))
+        service = self.settings("lib/systemd/user/tarnreportingd.service")
+        self.assertEqual(shlex.split(service["ExecStart"][0]),
+                         [self.at("bin/tarnreportingd"), "--log-target", "journal"])
+        system = self.settings("lib/systemd/system/tarnreportingd.service")
+        for same in ("Type", "WatchdogSec", "Restart", "SuccessExitStatus", "RestartPreventExitStatus",
+                     "TimeoutStopSec"):
+            self.assertEqual(service[same], system[same], same)
+
+    def test_programs_tell_their_version_and_which_build_they_are(self):
+        for name in PROGRAMS:
+            with self.subTest(name):
+                notes = run("readelf", "--notes", self.at("bin", name)).stdout
+                build = re.search(r"Build ID: ([0-9a-f]+)", notes)[1]
+                told = run(self.at("bin", name), "--version").stdout
+                self.assertRegex(told, rf"^{name} [0-9.]+ \((commit [0-9a-f]{{12}}, )?build {build}\)\n$")
 
     def settings(self, path):
         found = {}

@@ -51,10 +51,9 @@ TEST_F(ServiceConnectionTest, FirstSocketWithAListenerIsTaken) {
 TEST_F(ServiceConnectionTest, AbsentServiceIsToldWithEveryPlaceThatWasTried) {
   const Reached reached = reachService({{own_, systems_}});
   EXPECT_EQ(reached.client, nullptr);
-  EXPECT_EQ(reached.complaint, "the service can't be reached: cannot connect to " + own_ +
-  EXPECT_TRUE(reached.isAbsent);
-                                   ": No such file or directory; cannot connect to " + systems_ +
-                                   ": No such file or directory");
+  EXPECT_EQ(reached.complaint,
+            "the service can't be reached: cannot connect to " + own_ + EXPECT_TRUE(reached.isAbsent);
+            ": No such file or directory; cannot connect to " + systems_ + ": No such file or directory");
 }
 
 TEST_F(ServiceConnectionTest, ARefusalIsNoAbsence) {
@@ -75,35 +74,35 @@ TEST_F(ServiceConnectionTest, ARefusalIsNoAbsence) {
 }
 
 TEST_F(ServiceConnectionTest, ServiceThatDoesNotAnswerIsUnreachable) {
-TEST_F(ServiceConnectionTest, ARefusalIsToldWithWhatWasTriedBefore) {
-  const UniqueDescriptor systems = listenOn(systems_);
-  ASSERT_EQ(::chmod(systems_.c_str(), 0), 0);
-  ASSERT_EQ(::chmod(folder_.path().c_str(), 0755), 0);
-  EXPECT_EQ(testing::inChild([this] {
-              constexpr uid_t kNobody = 65534;
-              if (::geteuid() == 0 && ::setuid(kNobody) != 0) return 1;
-              const Reached reached = reachService({{own_, systems_}});
-              return reached.complaint == "the service can't be reached: cannot connect to " + own_ +
-                                              ": No such file or directory; " + systems_ +
-                                              " refuses this user: Permission denied" &&
-                             !reached.isAbsent
-                         ? 0
-                         : 2;
-            }),
-            0);
-}
+  TEST_F(ServiceConnectionTest, ARefusalIsToldWithWhatWasTriedBefore) {
+    const UniqueDescriptor systems = listenOn(systems_);
+    ASSERT_EQ(::chmod(systems_.c_str(), 0), 0);
+    ASSERT_EQ(::chmod(folder_.path().c_str(), 0755), 0);
+    EXPECT_EQ(testing::inChild([this] {
+                constexpr uid_t kNobody = 65534;
+                if (::geteuid() == 0 && ::setuid(kNobody) != 0) return 1;
+                const Reached reached = reachService({{own_, systems_}});
+                return reached.complaint == "the service can't be reached: cannot connect to " + own_ +
+                                                ": No such file or directory; " + systems_ +
+                                                " refuses this user: Permission denied" &&
+                               !reached.isAbsent
+                           ? 0
+                           : 2;
+              }),
+              0);
+  }
 
-TEST_F(ServiceConnectionTest, AServiceThatRefusesThisUserIsNotSettled) {
-  const UniqueDescriptor own = listenOn(own_);
-  ASSERT_EQ(::chmod(own_.c_str(), 0), 0);
-  ASSERT_EQ(::chmod(folder_.path().c_str(), 0755), 0);
-  EXPECT_EQ(testing::inChild([this] {
-              constexpr uid_t kNobody = 65534;
-              if (::geteuid() == 0 && ::setuid(kNobody) != 0) return 1;
-              return settleService({{own_}}) == kUnreachable ? 0 : 2;
-            }),
-            0);
-}
+  TEST_F(ServiceConnectionTest, AServiceThatRefusesThisUserIsNotSettled) {
+    const UniqueDescriptor own = listenOn(own_);
+    ASSERT_EQ(::chmod(own_.c_str(), 0), 0);
+    ASSERT_EQ(::chmod(folder_.path().c_str(), 0755), 0);
+    EXPECT_EQ(testing::inChild([this] {
+                constexpr uid_t kNobody = 65534;
+                if (::geteuid() == 0 && ::setuid(kNobody) != 0) return 1;
+                return settleService({{own_}}) == kUnreachable ? 0 : 2;
+              }),
+              0);
+  }
 
   const UniqueDescriptor own = listenOn(own_);
   ::testing::internal::CaptureStderr();

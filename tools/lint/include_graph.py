@@ -71,6 +71,7 @@ ROOMS = {
     "tools/mutate": (),
     "tools/report": VALUES + ("host/system",) + STORE,
     "tools/ctl/terminal": PROGRAM,
+    "tools/manual": PROGRAM + ("tools/ctl",),
     "tools/ctl": PROGRAM + ("client", "dictionary", "tools/script", "tools/ctl/terminal"),
     "tools/ctl/sessions": PROGRAM + ("tools/ctl", "tools/ctl/terminal", "tools/report", "tools/script"),
     "tools/ctl/views": PROGRAM + ("client", "tools/ctl", "tools/ctl/terminal", "tools/report"),

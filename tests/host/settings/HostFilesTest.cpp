@@ -170,6 +170,69 @@ TEST(HostConfiguration, FileIsReadAndOneThatCannotBeIsNamed) {
   EXPECT_EQ(readConfiguration(folder.path()).error.text(), folder.path() + ": Is a directory");
 }
 
+TEST(HostConfiguration, DropInsHaveTheLastWordInTheOrderOfTheirNames) {
+  const TemporaryFolder folder;
+  folder.write("c.toml", "[recorder]\nmax_age_days = 2\nmax_megabytes = 3\n[snare]\nrefuse = \"NotSupported\"\n");
+  folder.write("c.toml.d/90-last.toml", "[recorder]\nmax_age_days = 9\n");
+  folder.write("c.toml.d/10-first.toml",
+               "[recorder]\nmax_age_days = 1\n[rtc]\nbackends = []\n[snare]\nrefuse = \"\"\n");
+  const Result<HostConfiguration> read = readConfigurationWithDropIns(folder.path("c.toml"), false);
+  ASSERT_TRUE(read.ok()) << read.error->text;
+  EXPECT_EQ(read.value.recorder.maxAgeDays, 9);
+  EXPECT_EQ(read.value.recorder.maxMegabytes, 3);
+  EXPECT_TRUE(read.value.rtc.backends.empty());
+  EXPECT_FALSE(read.value.snare.refuse);
+}
+
+TEST(HostConfiguration, OnlyFilesNamedAsSettingsAreDropIns) {
+  const TemporaryFolder folder;
+  folder.write("c.toml", "");
+  folder.write("c.toml.d/README", "no settings");
+  folder.write("c.toml.d/.hidden.toml", "no settings");
+  folder.write("c.toml.d/old.toml~", "no settings");
+  EXPECT_EQ(readConfigurationWithDropIns(folder.path("c.toml"), false).value, HostConfiguration());
+}
+
+TEST(HostConfiguration, WrongDropInIsToldWithItsFileAndNothingIsTaken) {
+  const TemporaryFolder folder;
+  folder.write("c.toml", "[recorder]\nmax_age_days = 2\n");
+  folder.write("c.toml.d/a.toml", "[recorder]\nmax_age_days = 3\n");
+  folder.write("c.toml.d/b.toml", "\n[recorder]\nmax_age = 3\n");
+  const Result<HostConfiguration> wrong = readConfigurationWithDropIns(folder.path("c.toml"), false);
+  EXPECT_EQ(wrong.error.text(), folder.path("c.toml.d/b.toml") + ":3: unknown key \"recorder.max_age\"");
+  EXPECT_EQ(wrong.value, HostConfiguration());
+}
+
+TEST(HostConfiguration, DropInThatCannotBeReadIsNamed) {
+  const TemporaryFolder folder;
+  folder.write("c.toml", "");
+  std::filesystem::create_directories(folder.path("c.toml.d/a.toml"));
+  EXPECT_EQ(readConfigurationWithDropIns(folder.path("c.toml"), false).error.text(),
+            folder.path("c.toml.d/a.toml") + ": Is a directory");
+  folder.write("e.toml.d", "a file in the folder's place");
+  EXPECT_EQ(readConfigurationWithDropIns(folder.path("e.toml"), true).error.text(),
+            folder.path("e.toml.d") + ": Not a directory");
+}
+
+TEST(HostConfiguration, MoreDropInsThanAnybodyHasAreRefused) {
+  const TemporaryFolder folder;
+  folder.write("c.toml", "");
+  for (int number = 0; number <= 256; ++number) {
+    folder.write("c.toml.d/" + std::to_string(number) + ".toml", "");
+  }
+  EXPECT_EQ(readConfigurationWithDropIns(folder.path("c.toml"), false).error.text(),
+            folder.path("c.toml.d") + ": too many files");
+}
+
+TEST(HostConfiguration, OnlyTheInstalledFileMayBeAbsentBesideItsDropIns) {
+  const TemporaryFolder folder;
+  EXPECT_EQ(readConfigurationWithDropIns(folder.path("c.toml"), true).value, HostConfiguration());
+  folder.write("c.toml.d/a.toml", "[recorder]\nmax_age_days = 3\n");
+  EXPECT_EQ(readConfigurationWithDropIns(folder.path("c.toml"), true).value.recorder.maxAgeDays, 3);
+  EXPECT_EQ(readConfigurationWithDropIns(folder.path("c.toml"), false).error.text(),
+            folder.path("c.toml") + ": No such file or directory");
+}
+
 TEST(JsonDeviceProperties, WithoutAFileTheDeviceHasNeitherProperty) {
   const JsonDeviceProperties properties;
   EXPECT_EQ(properties.boolean("InternalBuild"), false);

@@ -16,7 +16,7 @@ const HostEnvironment kUser{false, "/run/user/7", "/srv/u/state", "/srv/u"};
 
 ServiceCommand parse(std::vector<const char*> arguments, const HostEnvironment& environment = kUser) {
   arguments.insert(arguments.begin(), "tarnreportingd");
-  return parseServiceCommand(static_cast<int>(arguments.size()), arguments.data(), environment);
+  return parseServiceCommand(static_cast<int>(arguments.size()), arguments.data(), environment, "tarnreportingd 7");
 }
 
 std::string complaintOf(std::vector<const char*> arguments, const HostEnvironment& environment = kUser) {
@@ -41,6 +41,13 @@ TEST(HostPaths, ConfigurationIsThatOfTheProgramsInstallation) {
   EXPECT_EQ(of("/srv/tree/build/bin/tarnreportingd"), "/srv/tree/build/etc/tarnreporting/tarnreportingd.toml");
   EXPECT_EQ(of("an unknown program"), "");
   EXPECT_EQ(of(""), "");
+}
+
+TEST(HostPaths, DevicePropertiesLieBesideTheConfiguration) {
+  HostEnvironment installed = kUser;
+  installed.program = "/usr/bin/tarnreportingd";
+  EXPECT_EQ(defaultDevicePropertiesFile(installed), "/etc/tarnreporting/device.json");
+  EXPECT_EQ(defaultDevicePropertiesFile(HostEnvironment{}), "");
 }
 
 TEST(HostPaths, ClientsLookAtTheNamedSocketElseTheUsersThenTheSystems) {
@@ -123,7 +130,7 @@ TEST(ServiceOptions, VersionIsOneLine) {
   const ServiceCommand command = parse({"--version"});
   EXPECT_FALSE(command.options);
   EXPECT_TRUE(command.usage.ok());
-  EXPECT_EQ(command.output, "tarnreportingd " TARN_VERSION "\n");
+  EXPECT_EQ(command.output, "tarnreportingd 7\n");
 }
 
 TEST(StateDirectory, IsMadeWithItsParents) {

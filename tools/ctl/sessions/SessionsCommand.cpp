@@ -106,8 +106,8 @@ void addSessionsCommand(CLI::App& app, Context& context) {
   command->add_flag("--json", arguments->asJson, "Print one object a line");
   command->footer(
       "\nReads the recorder in the state directory; the service need not run. Times are local ones. ACTIVE is the "
-      "time\n"
-  command->add_flag("--all", arguments->all, "Also those that one of another type replaced before they ever ran");
+      "time\n" command->add_flag("--all", arguments->all,
+                                 "Also those that one of another type replaced before they ever ran");
       "between starts and stops. END says how the session ended: stopped, destroyed, replaced, retyped, client-gone,\n"
       "service-stopping or killed; running and open ones haven't.\n\n"
       "Examples:\n"
