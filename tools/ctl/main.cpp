@@ -13,6 +13,7 @@
 #include "host/settings/HostPaths.h"
 #include "tools/ctl/Command.h"
 #include "tools/ctl/terminal/Output.h"
+#include "tools/ctl/terminal/TimeOption.h"
 
 namespace tarn::ctl {
 
@@ -47,11 +48,11 @@ void describe(CLI::App& app, Context& context, Options& options) {
       ->type_name("PATH");
   app.add_option("--timeout", options.timeout, "How many seconds an answer may take (default: 5); then 69")
       ->type_name("S")
-      ->check(CLI::Range(0.001, kLongestSeconds));
+      ->check([](const std::string& text) { return checkSeconds(text, 0.001, kLongestSeconds); });
   app.add_option("--wait", options.wait,
                  "First wait until the service is there, so many seconds (default: 30); then 69")
       ->type_name("[=S]")
-      ->check(CLI::Range(0.0, kLongestSeconds));
+      ->check([](const std::string& text) { return checkSeconds(text, 0, kLongestSeconds); });
   app.add_option("--state-dir", context.stateDirectory, "The service's state directory")
       ->capture_default_str()
       ->type_name("DIR");
