@@ -26,6 +26,7 @@ constexpr Figure kFigures[] = {
     {"gathered", &measureGathered},
     {"recorded", &measureRecorded},
     {"queries", &measureQueries},
+    {"tools", &measureTools},
     {"fleet", &measureFleet},
     {"visible", &measureVisible},
     {"post", &measurePost},

@@ -12,6 +12,7 @@ void measureStream(const Settings& settings, Table& table);
 void measureGathered(const Settings& settings, Table& table);
 void measureRecorded(const Settings& settings, Table& table);
 void measureQueries(const Settings& settings, Table& table);
+void measureTools(const Settings& settings, Table& table);
 void measureFleet(const Settings& settings, Table& table);
 void measureVisible(const Settings& settings, Table& table);
 void measurePost(const Settings& settings, Table& table);

@@ -205,6 +205,7 @@ TEST_F(SessionCommandsTest, ShowTellsItOnOneScreen) {
             "  machine      thermal state Nominal, load 0.5\n"
             "\n"
             "back-ends\n"
+            "  events       rtc 6, tally 12\n"
             "  BACKEND  NAME                                             EVENTS\n"
             "  rtc      sendMessage                                           6\n"
             "  tally    sys.oxbow.longformaudio.IO.Error                      1\n"

@@ -122,6 +122,28 @@ TEST_F(SessionOverviewTest, OneThatEndedWithoutASummaryIsCountedByItsEvents) {
   EXPECT_EQ(overviews().front().overloads, 1);
 }
 
+TEST_F(SessionOverviewTest, OfManyWithoutASummaryEachIsCountedByItsEvents) {
+  addSession({});
+  for (std::int64_t id = 2; id <= 80; ++id) {
+    add(id, 1300, "killed");
+    addPeriod(id, 1000, 1300, lastEvent() + 1, lastEvent() + 3);
+    addOverload(id);
+    addOverload(id % 2 == 0 ? id : 2);
+  }
+  addOverload(0);
+  addSummary(3, 40);
+  addPeriod(3, 1400, 1500, lastEvent() - 2, lastEvent());
+  addOverload(3);
+  addPeriod(3, 1600, 0, lastEvent() - 2);
+  const auto all = overviews();
+  ASSERT_EQ(all.size(), 80U);
+  EXPECT_EQ(all[0].overloads, 0);
+  EXPECT_EQ(all[1].overloads, 2 + 39);
+  EXPECT_EQ(all[2].overloads, 41);
+  EXPECT_EQ(all[3].overloads, 2);
+  EXPECT_EQ(all[4].overloads, 1);
+}
+
 TEST_F(SessionOverviewTest, JsonHasEveryColumnAndWhatIsCounted) {
   add(1, 1300.5, "client-gone");
   addPeriod(1, 1000, 1010.5, 1, 3, 10, 2);

@@ -43,6 +43,26 @@ TEST(Terminal, IsAsWideAsColumnsSaysElseAsItIs) {
   EXPECT_FALSE(terminalOf({}, ColorChoice::Auto, false).width.has_value());
 }
 
+TEST(Terminal, TellsProgressWhereComplaintsAreOnATerminal) {
+  TerminalFacts facts;
+  facts.hasComplaintsOnTerminal = true;
+  facts.type = "xterm";
+  EXPECT_TRUE(terminalOf(facts, ColorChoice::Auto, false).progress.isTold);
+  EXPECT_TRUE(terminalOf(facts, ColorChoice::Never, false).printingProgress.isTold);
+  EXPECT_FALSE(terminalOf(facts, ColorChoice::Always, true).progress.isTold);
+  EXPECT_FALSE(terminalOf(facts, ColorChoice::Always, true).printingProgress.isTold);
+  EXPECT_FALSE(terminalOf(aTerminal(), ColorChoice::Auto, false).progress.isTold);
+  facts.type = "dumb";
+  EXPECT_FALSE(terminalOf(facts, ColorChoice::Auto, false).progress.isTold);
+}
+
+TEST(Terminal, TellsNoProgressBetweenResultsThatAreOnItToo) {
+  TerminalFacts facts = aTerminal();
+  facts.hasComplaintsOnTerminal = true;
+  EXPECT_TRUE(terminalOf(facts, ColorChoice::Auto, false).progress.isTold);
+  EXPECT_FALSE(terminalOf(facts, ColorChoice::Auto, false).printingProgress.isTold);
+}
+
 TEST(Terminal, PaintsOnlyWhereThereAreColours) {
   Terminal terminal;
   EXPECT_EQ(painted("text", Paint::Red, terminal), "text");

@@ -153,5 +153,13 @@ TEST_F(UserTimeZone, HasNoDaysThatTheCalendarDoesNotHave) {
   EXPECT_EQ(parsed("2024-02-29"), 1709161200);
 }
 
+TEST(Seconds, AreANumberBetweenTheTwo) {
+  EXPECT_EQ(checkSeconds("0.5", 0.5, 60), "");
+  EXPECT_EQ(checkSeconds("60", 0.5, 60), "");
+  for (const char* const text : {"0.4", "60.5", "nan", "inf", "-1", "", "5s", " 5", "five"}) {
+    EXPECT_EQ(checkSeconds(text, 0.5, 60), "\"" + std::string(text) + "\" is no number of seconds from 0.5 to 60");
+  }
+}
+
 }  // namespace
 }  // namespace tarn::ctl

@@ -22,6 +22,8 @@ TEST_F(Ctl, WrongUsageIs64) {
                                                       {"defaults", "read"},
                                                       {"notify"},
                                                       {"--what", "status"},
+                                                      {"--timeout", "nan", "status"},
+                                                      {"--wait=nan", "status"},
                                                       {"events", "--after", "x"}};
   for (const auto& words : rows) {
     const Finished finished = ctl(words);
@@ -102,6 +104,11 @@ TEST_F(Ctl, EveryCommandHasItsHelp) {
                                                 {"reporters", "--help"},
                                                 {"kill", "--help"},
                                                 {"status", "--help"},
+                                                {"sessions", "--help"},
+                                                {"show", "--help"},
+                                                {"export", "--help"},
+                                                {"report", "--help"},
+                                                {"top", "--help"},
                                                 {"lint", "--help"},
                                                 {"explain", "--help"}}) {
     const Finished finished = ctl(words);

@@ -2,6 +2,8 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
+
 #include "tests/report/StoreFile.h"
 
 namespace tarn::report {
@@ -155,6 +157,33 @@ TEST_F(ReportMaker, FileThatIsNotThereIsRefusedWithItsName) {
   const Status opened = store.open();
   ASSERT_TRUE(opened.failed());
   EXPECT_NE(opened->text.find("/none.sqlite3"), std::string::npos) << opened->text;
+}
+
+TEST_F(ReportMaker, TellsHowMuchIsRead) {
+  addThree();
+  for (const char* id : {"1", "40000", "100000"}) {
+    file_.sql("INSERT INTO events VALUES(" + std::string(id) +
+              ", 50, 'tally', 'sys.oxbow.tarnkit.IO.Error', '{}', '{}', 1)");
+  }
+  ReportStore store(file_.path());
+  ASSERT_TRUE(store.open().ok());
+  std::vector<double> told;
+  const Result<Report> report = makeReport(store, {}, 1000, [&](double part) { told.push_back(part); });
+  ASSERT_TRUE(report.ok());
+  EXPECT_EQ(report.value.range->totals.errors, 3);
+  ASSERT_EQ(told.size(), 7U);
+  EXPECT_TRUE(std::is_sorted(told.begin(), told.end()));
+  EXPECT_GT(told.front(), 0);
+  EXPECT_EQ(told.back(), 1);
+}
+
+TEST_F(ReportMaker, IdsThatNoRecorderGivesAreReadInAsFewParts) {
+  addThree();
+  for (const char* id : {"-9223372036854775807", "-5", "1", "9223372036854775807"}) {
+    file_.sql("INSERT INTO events VALUES(" + std::string(id) +
+              ", 50, 'tally', 'sys.oxbow.tarnkit.IO.Error', '{}', '{}', 1)");
+  }
+  EXPECT_EQ(make().value.range->totals.errors, 4);
 }
 
 }  // namespace

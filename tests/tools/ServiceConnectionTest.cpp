@@ -1,6 +1,7 @@
 // Where tarnreportingctl finds the service, and what it says when it doesn't.
 #include "tools/ctl/ServiceConnection.h"
 
+#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
@@ -51,9 +52,10 @@ TEST_F(ServiceConnectionTest, FirstSocketWithAListenerIsTaken) {
 TEST_F(ServiceConnectionTest, AbsentServiceIsToldWithEveryPlaceThatWasTried) {
   const Reached reached = reachService({{own_, systems_}});
   EXPECT_EQ(reached.client, nullptr);
-  EXPECT_EQ(reached.complaint,
-            "the service can't be reached: cannot connect to " + own_ + EXPECT_TRUE(reached.isAbsent);
-            ": No such file or directory; cannot connect to " + systems_ + ": No such file or directory");
+  EXPECT_TRUE(reached.isAbsent);
+  EXPECT_EQ(reached.complaint, "the service can't be reached: cannot connect to " + own_ +
+                                   ": No such file or directory; cannot connect to " + systems_ +
+                                   ": No such file or directory");
 }
 
 TEST_F(ServiceConnectionTest, ARefusalIsNoAbsence) {
@@ -73,37 +75,37 @@ TEST_F(ServiceConnectionTest, ARefusalIsNoAbsence) {
             0);
 }
 
+TEST_F(ServiceConnectionTest, ARefusalIsToldWithWhatWasTriedBefore) {
+  const UniqueDescriptor systems = listenOn(systems_);
+  ASSERT_EQ(::chmod(systems_.c_str(), 0), 0);
+  ASSERT_EQ(::chmod(folder_.path().c_str(), 0755), 0);
+  EXPECT_EQ(testing::inChild([this] {
+              constexpr uid_t kNobody = 65534;
+              if (::geteuid() == 0 && ::setuid(kNobody) != 0) return 1;
+              const Reached reached = reachService({{own_, systems_}});
+              return reached.complaint == "the service can't be reached: cannot connect to " + own_ +
+                                              ": No such file or directory; " + systems_ +
+                                              " refuses this user: Permission denied" &&
+                             !reached.isAbsent
+                         ? 0
+                         : 2;
+            }),
+            0);
+}
+
+TEST_F(ServiceConnectionTest, AServiceThatRefusesThisUserIsNotSettled) {
+  const UniqueDescriptor own = listenOn(own_);
+  ASSERT_EQ(::chmod(own_.c_str(), 0), 0);
+  ASSERT_EQ(::chmod(folder_.path().c_str(), 0755), 0);
+  EXPECT_EQ(testing::inChild([this] {
+              constexpr uid_t kNobody = 65534;
+              if (::geteuid() == 0 && ::setuid(kNobody) != 0) return 1;
+              return settleService({{own_}}) == kUnreachable ? 0 : 2;
+            }),
+            0);
+}
+
 TEST_F(ServiceConnectionTest, ServiceThatDoesNotAnswerIsUnreachable) {
-  TEST_F(ServiceConnectionTest, ARefusalIsToldWithWhatWasTriedBefore) {
-    const UniqueDescriptor systems = listenOn(systems_);
-    ASSERT_EQ(::chmod(systems_.c_str(), 0), 0);
-    ASSERT_EQ(::chmod(folder_.path().c_str(), 0755), 0);
-    EXPECT_EQ(testing::inChild([this] {
-                constexpr uid_t kNobody = 65534;
-                if (::geteuid() == 0 && ::setuid(kNobody) != 0) return 1;
-                const Reached reached = reachService({{own_, systems_}});
-                return reached.complaint == "the service can't be reached: cannot connect to " + own_ +
-                                                ": No such file or directory; " + systems_ +
-                                                " refuses this user: Permission denied" &&
-                               !reached.isAbsent
-                           ? 0
-                           : 2;
-              }),
-              0);
-  }
-
-  TEST_F(ServiceConnectionTest, AServiceThatRefusesThisUserIsNotSettled) {
-    const UniqueDescriptor own = listenOn(own_);
-    ASSERT_EQ(::chmod(own_.c_str(), 0), 0);
-    ASSERT_EQ(::chmod(folder_.path().c_str(), 0755), 0);
-    EXPECT_EQ(testing::inChild([this] {
-                constexpr uid_t kNobody = 65534;
-                if (::geteuid() == 0 && ::setuid(kNobody) != 0) return 1;
-                return settleService({{own_}}) == kUnreachable ? 0 : 2;
-              }),
-              0);
-  }
-
   const UniqueDescriptor own = listenOn(own_);
   ::testing::internal::CaptureStderr();
   EXPECT_EQ(askService({{own_}, 20ms}, client::status()).status, 69);
@@ -126,6 +128,47 @@ TEST_F(ServiceConnectionTest, WaitingEndsWhenItsTimeIsUp) {
 
 TEST_F(ServiceConnectionTest, AServiceThatIsNotThereIsSettled) {
   EXPECT_EQ(settleService({{own_}}), 0);
+}
+
+TEST(OutputTest, LinesMayWaitForOneAnother) {
+  int ends[2];
+  ASSERT_EQ(::pipe2(ends, O_NONBLOCK), 0);
+  const UniqueDescriptor reading(ends[0]);
+  const UniqueDescriptor writing(ends[1]);
+  ASSERT_GE(::fcntl(writing.get(), F_SETPIPE_SZ, 1 << 17), 1 << 17);
+  Output output(writing.get(), Output::Pace::Together);
+  EXPECT_TRUE(output.line("one"));
+  EXPECT_TRUE(output.paintedLine("two"));
+  char text[256];
+  EXPECT_EQ(::read(reading.get(), text, sizeof text), -1);
+  EXPECT_TRUE(output.flush());
+  EXPECT_EQ(std::string(text, static_cast<std::size_t>(::read(reading.get(), text, sizeof text))), "one\ntwo\n");
+  for (std::size_t size = 0; size < std::size_t{64} << 10; size += 1001) {
+    EXPECT_TRUE(output.line(std::string(1000, 'x')));
+  }
+  EXPECT_EQ(::read(reading.get(), text, sizeof text), 256);
+}
+
+TEST(OutputTest, WhatWaitsAtTheEndIsWritten) {
+  int ends[2];
+  ASSERT_EQ(::pipe2(ends, O_NONBLOCK), 0);
+  const UniqueDescriptor reading(ends[0]);
+  UniqueDescriptor writing(ends[1]);
+  char text[256];
+  {
+    Output output(writing.get(), Output::Pace::Together);
+    output.line("one");
+    EXPECT_EQ(output.status(), kSuccess);
+    EXPECT_EQ(::read(reading.get(), text, sizeof text), 4);
+    output.line("two");
+  }
+  EXPECT_EQ(::read(reading.get(), text, sizeof text), 4);
+  const UniqueDescriptor full(::open("/dev/full", O_WRONLY | O_CLOEXEC));
+  Output refused(full.get(), Output::Pace::Together);
+  EXPECT_TRUE(refused.line("three"));
+  ::testing::internal::CaptureStderr();
+  EXPECT_EQ(refused.status(), kFailure);
+  EXPECT_NE(::testing::internal::GetCapturedStderr().find("No space left on device"), std::string::npos);
 }
 
 TEST(OutputTest, WhatATerminalWouldObeyIsWrittenOut) {

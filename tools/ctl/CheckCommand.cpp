@@ -6,6 +6,7 @@
 #include <vector>
 
 #include "recorder/store/StoreReport.h"
+#include "recorder/store/reading/StoreAccess.h"
 #include "tools/ctl/Command.h"
 #include "tools/ctl/terminal/Output.h"
 
@@ -30,7 +31,12 @@ void printRanges(Output& output, std::string_view what, const std::vector<IdRang
 int checkStore(const Context& context) {
   if (!isNamed(context.stateDirectory, "--state-dir")) return kWrongUsage;
   const std::string path = context.stateDirectory + "/recorder.sqlite3";
-  const auto inspected = recorder::inspectStore(path);
+  if (recorder::presenceOf(path) == recorder::Presence::Refused) {
+    complain(recorder::refusalOf(path).text);
+    return kFailure;
+  }
+  const auto inspected = withProgress(context.terminal.progress, "checking the store",
+                                      [&](const ProgressHandler&) { return recorder::inspectStore(path); });
   if (inspected.failed()) {
     complain("can't check " + printable(path) + ": " + printable(inspected.error->text));
     return kFailure;

@@ -61,11 +61,4 @@ void addShowCommand(CLI::App& app, Context& context);
 // Prints one of them for other programs, or as a script.
 void addExportCommand(CLI::App& app, Context& context);
 
-// Lists the sessions that the recorder holds.
-void addSessionsCommand(CLI::App& app, Context& context);
-// Tells what one of them did, on one screen.
-void addShowCommand(CLI::App& app, Context& context);
-// Prints one of them for other programs, or as a script.
-void addExportCommand(CLI::App& app, Context& context);
-
 }  // namespace tarn::ctl

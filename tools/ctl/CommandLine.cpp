@@ -3,6 +3,7 @@
 #include <CLI/CLI.hpp>
 
 #include "tools/ctl/Command.h"
+#include "tools/ctl/terminal/TimeOption.h"
 
 namespace tarn::ctl {
 
@@ -29,11 +30,11 @@ void describeCommandLine(CLI::App& app, Context& context, Options& options, cons
       ->type_name("PATH");
   app.add_option("--timeout", options.timeout, "How many seconds an answer may take (default: 5); then 69")
       ->type_name("S")
-      ->check(CLI::Range(0.001, kLongestSeconds));
+      ->check([](const std::string& text) { return checkSeconds(text, 0.001, kLongestSeconds); });
   app.add_option("--wait", options.wait,
                  "First wait until the service is there, so many seconds (default: 30); then 69")
       ->type_name("[=S]")
-      ->check(CLI::Range(0.0, kLongestSeconds));
+      ->check([](const std::string& text) { return checkSeconds(text, 0, kLongestSeconds); });
   app.add_option("--state-dir", context.stateDirectory, "The service's state directory")
       ->capture_default_str()
       ->type_name("DIR");

@@ -65,7 +65,7 @@ class Findings {
     output_.line(printable(script_) + ":" + std::to_string(line) + ": " + printable(text));
   }
   bool good() const { return output_.good(); }
-  int status() const {
+  int status() {
     if (const int status = output_.status(); status != kSuccess) return status;
     return any_ ? kBadInput : kSuccess;
   }

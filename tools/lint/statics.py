@@ -17,8 +17,7 @@ PRODUCT = ("adapters/", "client/", "clients/", "derived/", "diagnostics/", "dict
 EXCEPTIONS = {
     ("plist/Key.cpp", "instance"): "one copy of each text that never changes; keys are made before main",
     ("plist/KeyList.cpp", "instance"): "one copy of each key list that never changes, likewise",
-    ("tools/ctl/sessions/EventsCommand.cpp", "stopRequested"): "a signal handler reaches nothing else",
-    ("tools/ctl/views/TopCommand.cpp", "stopRequested"): "a signal handler reaches nothing else",
+    ("tools/ctl/terminal/StopRequest.cpp", "stopRequested"): "a signal handler reaches nothing else",
     ("recorder/store/files/MappedGuard.cpp", "guarded"): "a signal handler reaches nothing else",
     ("recorder/store/files/MappedGuard.cpp", "once"): "the handler is installed once a process",
     **{("clients/c/src/Forks.cpp", name): "fork() happens to the whole process that loaded the library"

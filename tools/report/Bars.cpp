@@ -13,7 +13,7 @@ namespace {
 constexpr double kRow = 22;
 constexpr double kBarHeight = 14;
 constexpr double kLabelRoom = 300;  // at the left of bars
-constexpr double kValueRoom = 150;  // at their right
+constexpr double kValueRoom = 200;  // at their right: "12345 overloads, 12345 errors"
 constexpr std::size_t kLabelCharacters = 38;
 constexpr double kAxisRoom = 60;  // at the left of columns
 constexpr double kPlotTop = 24;

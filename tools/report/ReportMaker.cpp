@@ -44,7 +44,7 @@ Ids withoutRepeats(const Ids& ids) {
 
 // The overview of these sessions; all that is read is of the range.
 Result<RangePicture> rangeOf(ReportStore& store, const std::vector<SessionRow>& sessions, const TimeRange& range,
-                             double now) {
+                             double now, const std::function<void(double)>& progress) {
   RangeBuilder builder(range, now);
   for (const SessionRow& session : sessions) {
     builder.add(session);
@@ -54,7 +54,8 @@ Result<RangePicture> rangeOf(ReportStore& store, const std::vector<SessionRow>& 
   for (const PeriodRow& period : periods.value) {
     builder.add(period);
   }
-  const Status counted = store.countedEvents(range, [&](const EventRow& event) { builder.add(event); });
+  const Status counted = store.countedEvents(
+      range, [&](const EventRow& event) { builder.add(event); }, progress);
   if (counted.failed()) return {{}, counted};
   return {builder.picture()};
 }
@@ -80,7 +81,8 @@ Result<std::vector<SessionPicture>> picturesOf(ReportStore& store, const std::ve
 
 }  // namespace
 
-Result<Report> makeReport(ReportStore& store, const ReportRequest& request, double now) {
+Result<Report> makeReport(ReportStore& store, const ReportRequest& request, double now,
+                          const std::function<void(double)>& progress) {
   Result<Report> made;
   made.value.made = now;
   Ids ids = withoutRepeats(request.sessions);
@@ -94,7 +96,7 @@ Result<Report> makeReport(ReportStore& store, const ReportRequest& request, doub
     }
   }
   if (sessions.value.size() != 1 || !areNamed) {
-    Result<RangePicture> range = rangeOf(store, sessions.value, request.range, now);
+    Result<RangePicture> range = rangeOf(store, sessions.value, request.range, now, progress);
     if (range.failed()) return {{}, range.error};
     made.value.range = std::move(range.value);
   }

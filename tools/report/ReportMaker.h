@@ -2,6 +2,7 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <vector>
 
 #include "plist/Result.h"
@@ -20,6 +21,8 @@ struct ReportRequest {
 
 // Over a range the worst sessions come first and then the newest small ones, as long as the page has room; see Page.h.
 // One session alone has no overview. Fails when the store can't be read, and when a named session isn't there.
-Result<Report> makeReport(ReportStore& store, const ReportRequest& request, double now);
+// `progress` hears how much of the store is read, from 0 to 1.
+Result<Report> makeReport(ReportStore& store, const ReportRequest& request, double now,
+                          const std::function<void(double)>& progress = {});
 
 }  // namespace tarn::report

@@ -1,5 +1,6 @@
 #include "tools/report/ReportStore.h"
 
+#include <algorithm>
 #include <limits>
 #include <utility>
 
@@ -20,6 +21,32 @@ constexpr std::string_view kMayCount =
     "(name = 'sys.oxbow.tarnkit.Volume.Summary' OR name GLOB '*.Error' OR name GLOB '*.IssueDetector' "
     "OR name GLOB 'sys.oxbow.tarnkit.Error.*' OR name GLOB 'sys.oxbow.tarnkit.*_Error.*' "
     "OR instr(payload, 'overload') > 0)";
+
+// Ids are asked about in so many parts at the most, so that it can be told how far that is, and of so many at the
+// least.
+constexpr std::uint64_t kMostParts = 64;
+constexpr std::uint64_t kIdsAtOnce = 16384;
+
+// A file that isn't ours may hold any ids, so they are counted without a sign.
+std::uint64_t distance(std::int64_t from, std::int64_t to) {
+  return static_cast<std::uint64_t>(to) - static_cast<std::uint64_t>(from);
+}
+
+// Calls `ask(first, last)` for each part of the ids, until it fails.
+template <class Ask>
+Status inParts(std::int64_t first, std::int64_t last, Ask ask, const std::function<void(double)>& progress) {
+  const std::uint64_t step = std::max(kIdsAtOnce, distance(first, last) / kMostParts + 1);
+  for (std::int64_t from = first;;) {
+    const bool isLast = distance(from, last) < step;
+    const std::int64_t to = isLast ? last : from + static_cast<std::int64_t>(step) - 1;
+    if (Status error = ask(from, to); error.failed()) return error;
+    if (progress) {
+      progress(static_cast<double>(distance(first, to) + 1) / static_cast<double>(distance(first, last) + 1));
+    }
+    if (isLast) return {};
+    from = to + 1;
+  }
+}
 
 std::optional<double> realOrNothing(const recorder::Statement& row, int column) {
   return row.isNull(column) ? std::nullopt : std::optional<double>(row.real(column));
@@ -50,6 +77,11 @@ PeriodRow periodRow(const recorder::Statement& row) {
   return period;
 }
 
+recorder::Statement& bindRange(recorder::Statement& rows, const TimeRange& range) {
+  constexpr double kEver = std::numeric_limits<double>::infinity();
+  return rows.bind(1, range.since.value_or(-kEver)).bind(2, range.until.value_or(kEver));
+}
+
 std::string listOf(const std::vector<std::int64_t>& ids) {
   std::string list = "(";
   for (const std::int64_t id : ids) {
@@ -61,11 +93,14 @@ std::string listOf(const std::vector<std::int64_t>& ids) {
 }  // namespace
 
 Status ReportStore::each(const std::string& sql, const TimeRange& range, const StoreMoment::Take& take) {
-  constexpr double kEver = std::numeric_limits<double>::infinity();
-  const auto bind = [&](recorder::Statement& rows) {
-    rows.bind(1, range.since.value_or(-kEver)).bind(2, range.until.value_or(kEver));
-  };
+  const auto bind = [&](recorder::Statement& rows) { bindRange(rows, range); };
   return moment_.each(sql, bind, take);
+}
+
+Result<std::int64_t> ReportStore::numberOf(const std::string& sql) {
+  Result<std::int64_t> found;
+  found.error = each(sql, {}, [&](const recorder::Statement& row) { found.value = row.integer(0); });
+  return found;
 }
 
 Result<std::vector<SessionRow>> ReportStore::sessions(const TimeRange& range) {
@@ -90,13 +125,10 @@ Result<std::vector<PeriodRow>> ReportStore::periods(const TimeRange& range) {
   return read;
 }
 
-Status ReportStore::countedEvents(const TimeRange& range, const std::function<void(const EventRow&)>& take) {
+Status ReportStore::countedEvents(const TimeRange& range, const std::function<void(const EventRow&)>& take,
+                                  const std::function<void(double)>& progress) {
   EventRow event;
-  const std::string sql =
-      "SELECT id, session, time, backend, name, payload FROM events WHERE session IS NOT NULL AND "
-      "time >= ?1 AND time < ?2 AND " +
-      std::string(kIsMessage) + " AND " + std::string(kMayCount);
-  return each(sql, range, [&](const recorder::Statement& row) {
+  const auto takeRow = [&](const recorder::Statement& row) {
     event.id = row.integer(0);
     event.session = row.integer(1);
     event.time = row.real(2);
@@ -104,7 +136,21 @@ Status ReportStore::countedEvents(const TimeRange& range, const std::function<vo
     event.name = row.text(4);
     event.payload = row.text(5);
     take(event);
-  });
+  };
+  const std::string sql =
+      "SELECT id, session, time, backend, name, payload FROM events WHERE id >= ?3 AND id <= ?4 AND "
+      "session IS NOT NULL AND time >= ?1 AND time < ?2 AND " +
+      std::string(kIsMessage) + " AND " + std::string(kMayCount);
+  const auto askAbout = [&](std::int64_t first, std::int64_t last) {
+    const auto bind = [&](recorder::Statement& rows) { bindRange(rows, range).bind(3, first).bind(4, last); };
+    return moment_.each(sql, bind, takeRow);
+  };
+  // One by one: for both at once SQLite would go through the whole view.
+  const Result<std::int64_t> first = numberOf("SELECT min(id) FROM events");
+  const Result<std::int64_t> last = numberOf("SELECT max(id) FROM events");
+  if (first.failed()) return first.error;
+  if (last.failed()) return last.error;
+  return inParts(first.value, last.value, askAbout, progress);
 }
 
 Result<std::map<std::int64_t, std::vector<EventRow>>> ReportStore::eventsOf(const std::vector<std::int64_t>& ids) {

@@ -33,8 +33,9 @@ class ReportStore {
   // Periods of which a part lies in the range.
   Result<std::vector<PeriodRow>> periods(const TimeRange& range);
   // Calls `take` for each event of the range that a report over many sessions may count; see isCountedByName(). The
-  // row is the reader's own and changes with the next one.
-  [[nodiscard]] Status countedEvents(const TimeRange& range, const std::function<void(const EventRow&)>& take);
+  // row is the reader's own and changes with the next one. `progress` hears how much is read, from 0 to 1.
+  [[nodiscard]] Status countedEvents(const TimeRange& range, const std::function<void(const EventRow&)>& take,
+                                     const std::function<void(double)>& progress = {});
   // All events of these sessions in the order of their ids, by session. Payloads are those of the messages alone.
   Result<std::map<std::int64_t, std::vector<EventRow>>> eventsOf(const std::vector<std::int64_t>& ids);
   Result<std::map<std::int64_t, std::vector<PeriodRow>>> periodsOf(const std::vector<std::int64_t>& ids);
@@ -42,6 +43,9 @@ class ReportStore {
  private:
   // Asks with the range's ends in the first two places.
   [[nodiscard]] Status each(const std::string& sql, const TimeRange& range, const StoreMoment::Take& take);
+
+  // The number in the one row of an answer; 0 for none.
+  Result<std::int64_t> numberOf(const std::string& sql);
 
   StoreMoment moment_;
 };

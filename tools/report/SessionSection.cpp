@@ -76,7 +76,8 @@ void writeFacts(Markup& markup, const SessionPicture& picture) {
   }
   if (picture.totals) {
     facts.row("Its own summary", durationText(picture.totals->activeSeconds) + " active in " +
-                                     std::to_string(picture.totals->activeCount) + " stretches, " +
+                                     std::to_string(picture.totals->activeCount) +
+                                     (picture.totals->activeCount == 1 ? " stretch, " : " stretches, ") +
                                      std::to_string(picture.totals->overloads) + " overloads, " +
                                      std::to_string(picture.totals->messages) + " messages in its last period");
   }

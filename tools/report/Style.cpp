@@ -40,6 +40,7 @@ th, td { border: 1px solid var(--rule); padding: .15rem .5rem; text-align: left;
 thead th { background: var(--panel); overflow-wrap: normal; }
 th { font-weight: 600; }
 .n { text-align: right; font-variant-numeric: tabular-nums; white-space: nowrap; }
+.facts .n { text-align: left; }
 summary { cursor: pointer; color: var(--link); }
 @media print {
   body { max-width: none; padding: 0; font-size: 10pt; }

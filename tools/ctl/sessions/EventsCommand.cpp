@@ -1,12 +1,11 @@
-#include <poll.h>
 #include <unistd.h>
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
 #include <chrono>
-#include <csignal>
 #include <limits>
 #include <memory>
+#include <optional>
 
 #include "recorder/store/reading/EventReader.h"
 #include "recorder/store/reading/StoreAccess.h"
@@ -14,6 +13,8 @@
 #include "tools/ctl/EventText.h"
 #include "tools/ctl/sessions/SessionEvents.h"
 #include "tools/ctl/terminal/Output.h"
+#include "tools/ctl/terminal/Progress.h"
+#include "tools/ctl/terminal/StopRequest.h"
 #include "tools/ctl/terminal/TimeOption.h"
 
 namespace tarn::ctl {
@@ -35,33 +36,17 @@ struct Arguments {
   bool once = false;
 };
 
-volatile std::sig_atomic_t stopRequested = 0;
-
-void requestStop(int /*signal*/) {
-  stopRequested = 1;
-}
-
-// SIGINT and SIGTERM end a tail as its reader wishes, which is no failure.
-void stopOnSignals() {
-  struct sigaction action {};
-  action.sa_handler = requestStop;
-  ::sigaction(SIGINT, &action, nullptr);
-  ::sigaction(SIGTERM, &action, nullptr);
-}
-
-// Whether anybody still reads what is printed; a pipe whose reader left says so without anything being written.
-bool outputIsWanted() {
-  pollfd polled{STDOUT_FILENO, 0, 0};
-  return ::poll(&polled, 1, 0) <= 0 || (polled.revents & POLLERR) == 0;
-}
-
 class EventPrinter {
  public:
   EventPrinter(const Context& context, const Arguments& arguments)
       : path_(context.stateDirectory + "/recorder.sqlite3"),
         isQuiet_(context.terminal.quiet),
         arguments_(arguments),
-        reader_(path_) {}
+        reader_(path_) {
+    if (!arguments.follow) {
+      progress_.emplace(context.terminal.printingProgress, "printing the events");
+    }
+  }
 
   int print();
 
@@ -69,6 +54,12 @@ class EventPrinter {
   // Prints what is there beyond the last one. False when it can't be read.
   bool printNew();
   void printRow(const recorder::EventRow& row, bool hasSession);
+  // Complains; false.
+  bool fail(const std::string& why) {
+    progress_.reset();
+    complain(why);
+    return false;
+  }
   bool isEnough() const { return arguments_.limit > 0 && printed_ >= arguments_.limit; }
 
   static constexpr std::chrono::milliseconds kPatience{200};  // as long a signal may go unnoticed
@@ -78,7 +69,8 @@ class EventPrinter {
   const Arguments& arguments_;
   EventReader reader_;
   MessageSieve sieve_;
-  Output output_{STDOUT_FILENO};
+  Output output_{STDOUT_FILENO, Output::Pace::Together};
+  std::optional<Progress> progress_;
   std::int64_t after_ = 0;
   std::size_t printed_ = 0;
   bool isMissing_ = false;
@@ -89,12 +81,13 @@ int EventPrinter::print() {
   after_ = arguments_.query.after;
   if (!printNew()) return kFailure;
   if (isMissing_ && !arguments_.follow) {
-    complain("there are no events: " + path_ + " is not there");
+    fail("there are no events: " + path_ + " is not there");
     return kFailure;
   }
-  while (arguments_.follow && stopRequested == 0 && !isEnough() && output_.good() && outputIsWanted()) {
+  while (arguments_.follow && !isEnough() && output_.good() && !isStopRequested()) {
     if (reader_.waitForChange(kPatience) && !printNew()) return kFailure;
   }
+  progress_.reset();
   return output_.status();
 }
 
@@ -107,23 +100,18 @@ bool EventPrinter::printNew() {
       query.limit = std::min(query.limit, arguments_.limit - printed_);
     }
     page = reader_.read(query);
-    if (page.failed()) {
-      complain("can't read " + page.error->text);
-      return false;
-    }
+    if (page.failed()) return fail("can't read " + page.error->text);
     isMissing_ = page.value.missing;
     if (isMissing_) return true;
-    if (query.session && !page.value.hasSessions) {
-      complain(recorder::noSessionsIn(path_).text);
-      return false;
-    }
+    if (query.session && !page.value.hasSessions) return fail(recorder::noSessionsIn(path_).text);
     for (const recorder::EventRow& row : page.value.rows) {
       if (!arguments_.once || sieve_.letsThrough(row)) {
         printRow(row, page.value.hasSessions);
       }
     }
     after_ = page.value.lookedUpTo;
-  } while (page.value.more && !isEnough() && output_.good() && stopRequested == 0);
+    output_.flush();
+  } while (page.value.more && !isEnough() && output_.good() && !isStopRequested());
   return true;
 }
 

@@ -29,7 +29,7 @@ struct Arguments {
 };
 
 int printLines(const std::vector<std::string>& lines) {
-  Output output(STDOUT_FILENO);
+  Output output(STDOUT_FILENO, Output::Pace::Together);
   for (const std::string& line : lines) {
     if (!output.line(line)) break;
   }
@@ -37,21 +37,28 @@ int printLines(const std::vector<std::string>& lines) {
 }
 
 // One object over many lines: what `show` tells, and then every event, so that it is never in memory as a whole.
-int printJson(SessionReader& reader, const SessionRow& row) {
-  const Result<SessionStory> story = storyOf(reader, row, currentTime());
+int printJson(const Terminal& terminal, SessionReader& reader, const SessionRow& row) {
+  const Result<SessionStory> story =
+      withProgress(terminal.progress, "reading the session",
+                   [&](const ProgressHandler& progress) { return storyOf(reader, row, currentTime(), progress); });
   if (story.failed()) return sessionFailure(row.id, story.error);
-  Output output(STDOUT_FILENO);
+  Output output(STDOUT_FILENO, Output::Pace::Together);
   std::string line = storyJson(story.value);
   line.pop_back();
   output.line(line + ",\"events\":[");
   line.clear();
-  const Status read = eachEvent(reader.file(), row.id, 0, [&](recorder::EventRow&& event) {
-    if (!line.empty()) {
-      output.line(line + ",");
-    }
-    line = eventJson(event, true);
-    return output.good();
-  });
+  const auto print = [&](const ProgressHandler& progress) {
+    EventProgress told(story.value.overview.periods, progress);
+    return eachEvent(reader.file(), row.id, 0, [&](recorder::EventRow&& event) {
+      told.at(event.id);
+      if (!line.empty()) {
+        output.line(line + ",");
+      }
+      line = eventJson(event, true);
+      return output.good();
+    });
+  };
+  const Status read = withProgress(terminal.printingProgress, "printing the events", print);
   if (read.failed()) return sessionFailure(row.id, read);
   if (!line.empty()) {
     output.line(line);
@@ -72,10 +79,12 @@ int printScript(const SessionRow& row, const std::vector<recorder::PeriodRow>& p
 
 int exportSession(const Context& context, const Arguments& arguments) {
   return withSession(context, arguments.session, [&](SessionReader& reader, const SessionRow& row) {
-    if (arguments.format == "json") return printJson(reader, row);
+    if (arguments.format == "json") return printJson(context.terminal, reader, row);
     const auto periods = reader.periods(row.id);
     if (periods.failed()) return sessionFailure(row.id, periods.error);
-    const auto messages = messagesOf(reader.file(), row.id);
+    const auto messages = withProgress(
+        context.terminal.progress, "reading the session",
+        [&](const ProgressHandler& progress) { return messagesOf(reader.file(), row.id, periods.value, progress); });
     if (messages.failed()) return sessionFailure(row.id, messages.error);
     if (arguments.format == "csv") return printLines(tableOf(messages.value));
     if (arguments.format == "trace") return printLines(traceOf(row, periods.value, messages.value, currentTime()));

@@ -21,6 +21,11 @@ std::string_view kindOf(std::string_view name) {
 Status eachEvent(const std::filesystem::path& file, std::int64_t session, std::int64_t after,
                  const std::function<bool(recorder::EventRow&&)>& take) {
   recorder::EventReader reader(file);
+  return eachEvent(reader, session, after, take);
+}
+
+Status eachEvent(recorder::EventReader& reader, std::optional<std::int64_t> session, std::int64_t after,
+                 const std::function<bool(recorder::EventRow&&)>& take) {
   recorder::EventQuery query;
   query.session = session;
   query.after = after;
@@ -32,6 +37,15 @@ Status eachEvent(const std::filesystem::path& file, std::int64_t session, std::i
     }
     if (!page.value.more) return {};
     query.after = page.value.lookedUpTo;
+  }
+}
+
+EventProgress::EventProgress(const std::vector<recorder::PeriodRow>& periods, ProgressHandler handler) {
+  if (!handler || periods.empty() || !periods.front().firstEvent || !periods.back().lastEvent) return;
+  first_ = *periods.front().firstEvent;
+  last_ = *periods.back().lastEvent;
+  if (last_ > first_) {
+    handler_ = std::move(handler);
   }
 }
 

@@ -37,10 +37,14 @@ std::optional<SessionMessage> messageOf(const recorder::EventRow& row) {
   return message;
 }
 
-Result<std::vector<SessionMessage>> messagesOf(const std::filesystem::path& file, std::int64_t session) {
+Result<std::vector<SessionMessage>> messagesOf(const std::filesystem::path& file, std::int64_t session,
+                                               const std::vector<recorder::PeriodRow>& periods,
+                                               const ProgressHandler& progress) {
   Result<std::vector<SessionMessage>> found;
   MessageSieve sieve;
+  EventProgress told(periods, progress);
   found.error = eachEvent(file, session, 0, [&](recorder::EventRow&& row) {
+    told.at(row.id);
     auto message = sieve.letsThrough(row) ? messageOf(row) : std::nullopt;
     if (message) {
       found.value.push_back(std::move(*message));

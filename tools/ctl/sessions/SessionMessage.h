@@ -11,6 +11,8 @@
 #include "plist/Dictionary.h"
 #include "plist/Result.h"
 #include "recorder/store/reading/EventReader.h"
+#include "recorder/store/reading/SessionReader.h"
+#include "tools/ctl/terminal/Progress.h"
 #include "tools/report/Message.h"
 
 namespace tarn::ctl {
@@ -35,8 +37,11 @@ struct SessionMessage {
 
 // The message of an analytics event; nothing for another event, and for a payload that is no JSON object.
 std::optional<SessionMessage> messageOf(const recorder::EventRow& row);
-// All of a session, each once, in the order in which they were handed over. The error names the file.
-Result<std::vector<SessionMessage>> messagesOf(const std::filesystem::path& file, std::int64_t session);
+// All of a session, each once, in the order in which they were handed over; by its periods it is told how far that is.
+// The error names the file.
+Result<std::vector<SessionMessage>> messagesOf(const std::filesystem::path& file, std::int64_t session,
+                                               const std::vector<recorder::PeriodRow>& periods = {},
+                                               const ProgressHandler& progress = {});
 
 // Whether it tells of an overload, as the session's own summary counts them.
 inline bool isOverload(const SessionMessage& message) {

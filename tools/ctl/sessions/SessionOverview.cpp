@@ -4,6 +4,8 @@
 #include <array>
 #include <cmath>
 #include <cstdio>
+#include <map>
+#include <optional>
 #include <utility>
 
 #include "tools/ctl/sessions/JsonObject.h"
@@ -14,12 +16,15 @@ namespace tarn::ctl {
 
 namespace {
 
+using recorder::EventReader;
 using recorder::EventRow;
 using recorder::PeriodRow;
 using recorder::SessionReader;
 using recorder::SessionRow;
 
 constexpr const char* kSummaryEvent = "sys.oxbow.tarnkit.Session_Generic.Summary";
+// Beyond it, looking for each one's events takes longer than going through all.
+constexpr std::size_t kFewSessions = 64;
 constexpr const char* kOverload = R"("issue_type":"overload")";
 
 // A session that was killed has periods that nobody closed.
@@ -31,9 +36,17 @@ bool isRunning(const SessionOverview& overview) {
   return !overview.row.ended && !overview.periods.empty() && !overview.periods.back().stopped;
 }
 
-// What the newest summary says counts for all before it. When it was made at the end nothing comes after it; else the
-// events after it are gone through.
-Status countOverloads(SessionReader& reader, SessionOverview& overview) {
+// A session of whose events some aren't counted yet.
+struct Uncounted {
+  SessionOverview* overview = nullptr;
+  std::int64_t after = 0;  // those with greater ids
+  MessageSieve sieve;
+};
+using UncountedSessions = std::map<std::int64_t, Uncounted>;  // by their ids
+
+// What the newest summary says counts for all before it. When it was made at the end nothing comes after it, and of one
+// that never ran there is nothing; else the events after it are `uncounted`.
+Status countBySummary(SessionReader& reader, SessionOverview& overview, UncountedSessions& uncounted) {
   std::int64_t after = 0;
   bool isAtTheEnd = false;
   for (auto period = overview.periods.rbegin(); period != overview.periods.rend() && after == 0; ++period) {
@@ -46,15 +59,41 @@ Status countOverloads(SessionReader& reader, SessionOverview& overview) {
       isAtTheEnd = overview.row.ended && period == overview.periods.rbegin();
     }
   }
-  if (isAtTheEnd) return {};
-  MessageSieve sieve;
-  return eachEvent(reader.file(), overview.row.id, after, [&](EventRow&& row) {
-    // Most have no such thing, which is seen without reading them.
-    const bool isNews = sieve.letsThrough(row) && row.payload.find(kOverload) != std::string::npos;
-    const auto message = isNews ? messageOf(row) : std::nullopt;
-    overview.overloads += message && isOverload(*message) ? 1 : 0;
-    return true;
-  });
+  if (isAtTheEnd || overview.periods.empty()) return {};
+  Uncounted& rest = uncounted[overview.row.id];
+  rest.overview = &overview;
+  rest.after = after;
+  return {};
+}
+
+void countEvent(const EventRow& row, Uncounted& rest) {
+  // Most have no such thing, which is seen without reading them.
+  const bool isNews = rest.sieve.letsThrough(row) && row.payload.find(kOverload) != std::string::npos;
+  const auto message = isNews ? messageOf(row) : std::nullopt;
+  rest.overview->overloads += message && isOverload(*message) ? 1 : 0;
+}
+
+// Of few sessions one after the other; of many all events are gone through once.
+Status countByEvents(const std::filesystem::path& file, UncountedSessions& uncounted) {
+  if (uncounted.empty()) return {};
+  EventReader reader(file);
+  if (uncounted.size() > kFewSessions) {
+    return eachEvent(reader, std::nullopt, 0, [&](EventRow&& row) {
+      const auto rest = uncounted.find(row.session.value_or(0));
+      if (rest != uncounted.end() && row.id > rest->second.after) {
+        countEvent(row, rest->second);
+      }
+      return true;
+    });
+  }
+  for (auto& [session, rest] : uncounted) {
+    const Status read = eachEvent(reader, session, rest.after, [&rest = rest](EventRow&& row) {
+      countEvent(row, rest);
+      return true;
+    });
+    if (read.failed()) return read;
+  }
+  return {};
 }
 
 }  // namespace
@@ -64,13 +103,16 @@ std::string SessionOverview::state() const {
   return row.endReason;
 }
 
-Result<std::vector<SessionOverview>> overviewsOf(SessionReader& reader, std::vector<SessionRow> sessions, double now) {
+Result<std::vector<SessionOverview>> overviewsOf(SessionReader& reader, std::vector<SessionRow> sessions, double now,
+                                                 const ProgressHandler& progress) {
   Result<std::vector<SessionOverview>> made;
   if (sessions.empty()) return made;
   const std::int64_t first = sessions.front().id;
   const std::int64_t last = sessions.back().id;
   Result<std::vector<PeriodRow>> periods = reader.periods(first, last);
   if (periods.failed()) return {{}, periods.error};
+  UncountedSessions uncounted;
+  made.value.reserve(sessions.size());  // what isn't counted yet refers to them
   auto period = periods.value.begin();
   for (SessionRow& row : sessions) {
     SessionOverview overview;
@@ -83,10 +125,14 @@ Result<std::vector<SessionOverview>> overviewsOf(SessionReader& reader, std::vec
       overview.redundant += period->redundant;
       overview.periods.push_back(*period);
     }
-    made.error = countOverloads(reader, overview);
-    if (made.failed()) return made;
     made.value.push_back(std::move(overview));
+    made.error = countBySummary(reader, made.value.back(), uncounted);
+    if (made.failed()) return made;
+    if (progress) {
+      progress(static_cast<double>(made.value.size()) / static_cast<double>(sessions.size()));
+    }
   }
+  made.error = countByEvents(reader.file(), uncounted);
   return made;
 }
 

@@ -7,6 +7,7 @@
 
 #include "plist/Result.h"
 #include "recorder/store/reading/SessionReader.h"
+#include "tools/ctl/terminal/Progress.h"
 
 namespace tarn::ctl {
 
@@ -26,7 +27,8 @@ struct SessionOverview {
 // Of sessions that stand by ascending id; `now` in epoch seconds. Overloads are counted by the sessions' own summaries
 // and, of one that goes on or has none, by its events. The error names the file.
 Result<std::vector<SessionOverview>> overviewsOf(recorder::SessionReader& reader,
-                                                 std::vector<recorder::SessionRow> sessions, double now);
+                                                 std::vector<recorder::SessionRow> sessions, double now,
+                                                 const ProgressHandler& progress = {});
 
 // One object: the columns of the row, then running, active, periods, messages, redundant, overloads.
 std::string overviewJson(const SessionOverview& overview);

@@ -49,7 +49,8 @@ void sortMessages(std::vector<SessionMessage>& messages, SessionStory& story) {
 
 }  // namespace
 
-Result<SessionStory> storyOf(recorder::SessionReader& reader, const recorder::SessionRow& session, double now) {
+Result<SessionStory> storyOf(recorder::SessionReader& reader, const recorder::SessionRow& session, double now,
+                             const ProgressHandler& progress) {
   auto overviews = overviewsOf(reader, {session}, now);
   if (overviews.failed()) return {{}, overviews.error};
   auto run = reader.run(session.run);
@@ -57,7 +58,9 @@ Result<SessionStory> storyOf(recorder::SessionReader& reader, const recorder::Se
   SessionStory story;
   std::vector<SessionMessage> messages;
   MessageSieve sieve;
+  EventProgress told(overviews.value.front().periods, progress);
   const Status read = eachEvent(reader.file(), session.id, 0, [&](recorder::EventRow&& row) {
+    told.at(row.id);
     ++story.counts[{row.backend, row.name}];
     auto message = sieve.letsThrough(row) ? messageOf(row) : std::nullopt;
     if (message) {

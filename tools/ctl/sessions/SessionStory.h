@@ -29,7 +29,8 @@ struct SessionStory {
 };
 
 // `now` in epoch seconds. The error names the file.
-Result<SessionStory> storyOf(recorder::SessionReader& reader, const recorder::SessionRow& session, double now);
+Result<SessionStory> storyOf(recorder::SessionReader& reader, const recorder::SessionRow& session, double now,
+                             const ProgressHandler& progress = {});
 
 // On one screen: of long lists the beginning, and how much more there is.
 void printStory(const SessionStory& story, const TimeZone& zone, Output& output, const Terminal& terminal);

@@ -1,6 +1,7 @@
 #include <array>
 #include <cmath>
 #include <cstdio>
+#include <map>
 
 #include "tools/ctl/sessions/JsonObject.h"
 #include "tools/ctl/sessions/SessionStory.h"
@@ -164,6 +165,15 @@ void StoryPrinter::printSummary() {
 void StoryPrinter::printBackends() {
   if (story_.counts.empty()) return;
   section("back-ends");
+  std::map<std::string, std::int64_t> totals;
+  for (const auto& [name, count] : story_.counts) {
+    totals[name.first] += count;
+  }
+  std::string all;
+  for (const auto& [backend, count] : totals) {
+    all += (all.empty() ? "" : ", ") + backend + " " + std::to_string(count);
+  }
+  row("events", all);
   TextTable table({{"BACKEND"}, {"NAME", false, true}, {"EVENTS", true}});
   const std::size_t shown = std::min(story_.counts.size(), kMostOthers);
   auto each = story_.counts.begin();

@@ -72,14 +72,18 @@ int sessions(const Context& context, Arguments& arguments, bool hasGlob, bool ha
   overviews.error = reader.open();
   if (overviews.ok()) {
     auto rows = reader.sessions(arguments.query);
-    overviews = rows.ok() ? overviewsOf(reader, std::move(rows.value), currentTime())
-                          : Result<std::vector<SessionOverview>>{{}, rows.error};
+    overviews.error = rows.error;
+    if (rows.ok()) {
+      overviews = withProgress(context.terminal.progress, "reading the sessions", [&](const ProgressHandler& progress) {
+        return overviewsOf(reader, std::move(rows.value), currentTime(), progress);
+      });
+    }
   }
   if (overviews.failed()) {
     complain("can't list sessions: " + overviews.error->text);
     return kFailure;
   }
-  Output output(STDOUT_FILENO);
+  Output output(STDOUT_FILENO, Output::Pace::Together);
   if (!arguments.asJson) {
     printTable(overviews.value, output, context.terminal);
     return output.status();
@@ -103,11 +107,11 @@ void addSessionsCommand(CLI::App& app, Context& context) {
   command->add_option("--limit", arguments->limit, "The newest so many")
       ->type_name("N")
       ->check(CLI::Range(1, std::numeric_limits<int>::max()));
+  command->add_flag("--all", arguments->all, "Also those that one of another type replaced before they ever ran");
   command->add_flag("--json", arguments->asJson, "Print one object a line");
   command->footer(
       "\nReads the recorder in the state directory; the service need not run. Times are local ones. ACTIVE is the "
-      "time\n" command->add_flag("--all", arguments->all,
-                                 "Also those that one of another type replaced before they ever ran");
+      "time\n"
       "between starts and stops. END says how the session ended: stopped, destroyed, replaced, retyped, client-gone,\n"
       "service-stopping or killed; running and open ones haven't.\n\n"
       "Examples:\n"

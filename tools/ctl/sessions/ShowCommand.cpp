@@ -19,9 +19,11 @@ struct Arguments {
 
 int show(const Context& context, const Arguments& arguments) {
   return withSession(context, arguments.session, [&](recorder::SessionReader& reader, const recorder::SessionRow& row) {
-    const Result<SessionStory> story = storyOf(reader, row, currentTime());
+    const Result<SessionStory> story =
+        withProgress(context.terminal.progress, "reading the session",
+                     [&](const ProgressHandler& progress) { return storyOf(reader, row, currentTime(), progress); });
     if (story.failed()) return sessionFailure(row.id, story.error);
-    Output output(STDOUT_FILENO);
+    Output output(STDOUT_FILENO, Output::Pace::Together);
     if (arguments.asJson) {
       output.line(storyJson(story.value));
     } else {

@@ -8,27 +8,41 @@
 
 namespace tarn::ctl {
 
+namespace {
+
+// Bytes that are worth a write.
+constexpr std::size_t kMostWaiting = std::size_t{64} << 10;
+
+}  // namespace
+
 bool Output::line(std::string_view text) {
   if (!good()) return false;
-  buffer_.clear();
   plist::appendPrintable(buffer_, text, plist::LineEnds::Escaped);
-  return writeBuffer();
+  return endLine();
 }
 
 bool Output::paintedLine(std::string_view text) {
   if (!good()) return false;
-  buffer_ = text;
-  return writeBuffer();
+  buffer_ += text;
+  return endLine();
 }
 
-bool Output::writeBuffer() {
+bool Output::endLine() {
   buffer_ += '\n';
-  failure_ = linux_host::writeAll(fd_, buffer_);
+  const bool mayWait = pace_ == Pace::Together && buffer_.size() < kMostWaiting;
+  return mayWait ? good() : flush();
+}
+
+bool Output::flush() {
+  if (good() && !buffer_.empty()) {
+    failure_ = linux_host::writeAll(fd_, buffer_);
+    buffer_.clear();
+  }
   return good();
 }
 
-int Output::status() const {
-  if (good() || failure_->code == EPIPE) return kSuccess;
+int Output::status() {
+  if (flush() || failure_->code == EPIPE) return kSuccess;
   complain("can't write the results: " + failure_->text);
   return kFailure;
 }

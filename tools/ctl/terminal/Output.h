@@ -21,30 +21,39 @@ inline constexpr int kUnreachable = 69;  // no service listens on the socket, or
 // Once a line failed, further ones are left out and the first failure is kept.
 class Output {
  public:
+  // When lines are written: each at once, or many together, for those who print thousands of them.
+  enum class Pace { EachLine, Together };
+
   // Writes to `fd`, which stays the caller's.
-  explicit Output(int fd) : fd_(fd) {}
+  explicit Output(int fd, Pace pace = Pace::EachLine) : fd_(fd), pace_(pace) {}
+  // Writes what still waits.
+  ~Output() { flush(); }
   Output(const Output&) = delete;
   Output& operator=(const Output&) = delete;
 
-  // Writes one line now, printable() as a whole, which changes nothing of what a line of JSON says; its line end is
+  // Writes one line, printable() as a whole, which changes nothing of what a line of JSON says; its line end is
   // added. False once anything could not be written.
   bool line(std::string_view text);
 
   // The same for a line that was made printable part by part, so that paint may stand between them (Terminal).
   bool paintedLine(std::string_view text);
 
+  // Writes the lines that wait. False once anything could not be written.
+  bool flush();
+
   // Whether everything could be written so far. Who prints much looks at it between two lines.
   bool good() const noexcept { return failure_.ok(); }
-  // The exit status that the output itself asks for: success while it is good, and when the reader simply left; else it
-  // complains and says failure. Call it at the end, once: it complains each time.
-  int status() const;
+  // Writes the lines that wait. The exit status that the output itself asks for: success while it is good, and when the
+  // reader simply left; else it complains and says failure. Call it at the end, once: it complains each time.
+  int status();
 
  private:
-  // Its line end is added.
-  bool writeBuffer();
+  // Its line end is added to what waits, which is written as the pace says.
+  bool endLine();
 
-  int fd_;
-  std::string buffer_;
+  const int fd_;
+  const Pace pace_;
+  std::string buffer_;  // lines that wait
   Status failure_;
 };
 

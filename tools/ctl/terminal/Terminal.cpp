@@ -57,6 +57,7 @@ bool beginsCharacter(char byte) noexcept {
 TerminalFacts currentTerminal() {
   TerminalFacts facts;
   facts.isTerminal = ::isatty(STDOUT_FILENO) == 1;
+  facts.hasComplaintsOnTerminal = ::isatty(STDERR_FILENO) == 1;
   winsize size{};
   if (facts.isTerminal && ::ioctl(STDOUT_FILENO, TIOCGWINSZ, &size) == 0 && size.ws_col > 0) {
     facts.columns = size.ws_col;
@@ -69,7 +70,11 @@ TerminalFacts currentTerminal() {
 
 Terminal terminalOf(const TerminalFacts& facts, ColorChoice choice, bool quiet) {
   const auto asked = positiveNumber(facts.columnsVariable);
-  return {hasColor(facts, choice), quiet, asked ? asked : facts.columns};
+  ProgressPlace progress;
+  progress.isTold = facts.hasComplaintsOnTerminal && facts.type != "dumb" && !quiet;
+  ProgressPlace printing = progress;
+  printing.isTold = progress.isTold && !facts.isTerminal;
+  return {hasColor(facts, choice), quiet, asked ? asked : facts.columns, progress, printing};
 }
 
 std::string painted(std::string_view text, Paint paint, const Terminal& terminal) {

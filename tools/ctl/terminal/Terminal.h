@@ -6,20 +6,23 @@
 #include <string>
 #include <string_view>
 
+#include "tools/ctl/terminal/Progress.h"
+
 namespace tarn::ctl {
 
 enum class ColorChoice { Auto, Always, Never };
 
-// What the machine tells of where the results go.
+// What the machine tells of where results and complaints go.
 struct TerminalFacts {
-  bool isTerminal = false;
+  bool isTerminal = false;                  // stdout
+  bool hasComplaintsOnTerminal = false;     // stderr
   std::optional<std::size_t> columns = {};  // as the terminal tells
   // Variables; empty when they aren't set.
   std::string columnsVariable = {};  // COLUMNS
   std::string noColor = {};          // NO_COLOR
   std::string type = {};             // TERM
 };
-// Of standard output and this process.
+// Of this process.
 TerminalFacts currentTerminal();
 
 // How to print there.
@@ -27,9 +30,13 @@ struct Terminal {
   bool color = false;
   bool quiet = false;                     // no headings and no remarks: results alone
   std::optional<std::size_t> width = {};  // nothing: lines may be as long as they like
+  // While results are gathered; and while they are printed, which would stand between them on the same terminal.
+  ProgressPlace progress = {};
+  ProgressPlace printingProgress = {};
 };
 // Colours, unless a choice was made, on a terminal that isn't a dumb one, when NO_COLOR is not set. COLUMNS goes before
-// what the terminal says; what isn't a terminal and has no COLUMNS has no width.
+// what the terminal says; what isn't a terminal and has no COLUMNS has no width. Progress is for a stderr that is a
+// terminal and no dumb one, unless it is to be quiet.
 Terminal terminalOf(const TerminalFacts& facts, ColorChoice choice, bool quiet);
 
 enum class Paint { Plain, Bold, Dim, Red, Yellow, Green };

@@ -7,6 +7,7 @@
 #include <cmath>
 #include <ctime>
 
+#include "plist/ValueView.h"
 #include "tools/ctl/terminal/Output.h"
 
 namespace tarn::ctl {
@@ -170,6 +171,15 @@ bool TimeRange::read() {
     return false;
   }
   return true;
+}
+
+std::string checkSeconds(const std::string& text, double least, double most) {
+  double seconds = 0;
+  const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), seconds);
+  const bool isNumber = error == std::errc() && end == text.data() + text.size();
+  if (isNumber && seconds >= least && seconds <= most) return {};
+  return "\"" + text + "\" is no number of seconds from " + plist::ValueView(least).asText() + " to " +
+         plist::ValueView(most).asText();
 }
 
 double currentTime() {

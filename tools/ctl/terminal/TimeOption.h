@@ -52,6 +52,9 @@ struct TimeRange {
   bool read();
 };
 
+// For an option: what is wrong with a number of seconds between the two, "nan" included; nothing is wrong: empty.
+std::string checkSeconds(const std::string& text, double least, double most);
+
 // Epoch seconds now.
 double currentTime();
 

@@ -4,8 +4,10 @@
 
 #include <CLI/CLI.hpp>
 #include <cstdint>
+#include <limits>
 #include <memory>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "host/system/FileReplacement.h"
@@ -51,16 +53,21 @@ int printPage(const std::string& page) {
   return kFailure;
 }
 
+Result<report::Report> readReport(const std::string& file, const report::ReportRequest& request,
+                                  const ProgressHandler& progress) {
+  report::ReportStore store(file);
+  if (Status opened = store.open(); opened.failed()) return {{}, std::move(opened)};
+  return report::makeReport(store, request, currentTime(), progress);
+}
+
 int reportSessions(const Context& context, Arguments& arguments) {
   if (!arguments.range.read()) return kWrongUsage;
   if (!isNamed(context.stateDirectory, "--state-dir")) return kWrongUsage;
-  report::ReportStore store(context.stateDirectory + "/recorder.sqlite3");
-  if (const Status opened = store.open(); opened.failed()) {
-    complain(opened->text);
-    return kFailure;
-  }
   const report::ReportRequest request{arguments.sessions, {arguments.range.since, arguments.range.until}};
-  const Result<report::Report> made = report::makeReport(store, request, currentTime());
+  const Result<report::Report> made =
+      withProgress(context.terminal.progress, "reading the sessions", [&](const ProgressHandler& progress) {
+        return readReport(context.stateDirectory + "/recorder.sqlite3", request, progress);
+      });
   if (made.failed()) {
     complain(made.error->text);
     return kFailure;
@@ -68,7 +75,7 @@ int reportSessions(const Context& context, Arguments& arguments) {
   const std::string page = report::page(made.value);
   if (arguments.file.empty() || arguments.file == "-") return printPage(page);
   if (const Status written = writePage(arguments.file, page); written.failed()) {
-    complain("can't write the report: " + written->text);
+    complain("can't write the report to " + arguments.file + ": " + written->text);
     return kFailure;
   }
   return kSuccess;
@@ -80,7 +87,8 @@ void addReportCommand(CLI::App& app, Context& context) {
   CLI::App* command = app.add_subcommand("report", "Make one HTML page of sessions, with pictures and their numbers");
   const auto arguments = std::make_shared<Arguments>();
   command->add_option("SESSION", arguments->sessions, "Sessions by their numbers (default: all of the time)")
-      ->type_name("");
+      ->type_name("")
+      ->check(CLI::Range(std::int64_t{1}, std::numeric_limits<std::int64_t>::max()));
   arguments->range.addTo(*command, "Only what was there");
   command->add_option("-o,--output", arguments->file, "The page's file, replaced whole (default: stdout)")
       ->type_name("FILE.html");

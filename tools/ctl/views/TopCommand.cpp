@@ -1,17 +1,17 @@
-#include <poll.h>
 #include <sys/ioctl.h>
 #include <unistd.h>
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
 #include <chrono>
-#include <csignal>
 #include <cstdint>
 #include <memory>
 
 #include "host/system/Files.h"
 #include "tools/ctl/Command.h"
 #include "tools/ctl/terminal/Output.h"
+#include "tools/ctl/terminal/StopRequest.h"
+#include "tools/ctl/terminal/TimeOption.h"
 #include "tools/ctl/views/LiveSource.h"
 #include "tools/ctl/views/TopLoop.h"
 
@@ -27,28 +27,14 @@ struct Arguments {
   double interval = 1;
 };
 
-volatile std::sig_atomic_t stopRequested = 0;
-
-void requestStop(int /*signal*/) {
-  stopRequested = 1;
-}
-
-// A signal ends the view as its reader wishes, which is no failure.
-void stopOnSignals() {
-  struct sigaction action {};
-  action.sa_handler = requestStop;
-  ::sigaction(SIGINT, &action, nullptr);
-  ::sigaction(SIGTERM, &action, nullptr);
-}
-
 // A terminal is written anew with each view; elsewhere an empty line stands between two.
 class LiveScreen final : public TopScreen {
  public:
   explicit LiveScreen(const Arguments& arguments) : arguments_(arguments), isTerminal_(::isatty(STDOUT_FILENO) == 1) {}
 
   bool show(const TopView& view) override;
-  bool pause() override;
-  int status() const { return output_.status(); }
+  bool pause() override { return pauseUnlessStopped(std::chrono::duration<double>(arguments_.interval)); }
+  int status() { return output_.status(); }
 
  private:
   void showLines(const TopView& view);
@@ -85,21 +71,7 @@ bool LiveScreen::show(const TopView& view) {
   } else {
     showLines(view);
   }
-  return output_.good() && stopRequested == 0;
-}
-
-bool LiveScreen::pause() {
-  using Clock = std::chrono::steady_clock;
-  const auto until = Clock::now() + std::chrono::duration<double>(arguments_.interval);
-  while (stopRequested == 0) {
-    const auto left = std::chrono::ceil<std::chrono::milliseconds>(until - Clock::now());
-    if (left.count() <= 0) return true;
-    // A signal that comes just before the wait is seen with its end, so no wait is long.
-    pollfd polled{STDOUT_FILENO, 0, 0};
-    constexpr std::chrono::milliseconds kPatience{200};
-    if (::poll(&polled, 1, static_cast<int>(std::min(left, kPatience).count())) > 0) return false;
-  }
-  return false;
+  return output_.good() && !isStopRequested();
 }
 
 int top(const Context& context, const Arguments& arguments) {
@@ -122,7 +94,7 @@ void addTopCommand(CLI::App& app, Context& context) {
       ->check(CLI::PositiveNumber);
   command->add_option("--interval", arguments->interval, "Seconds from one view to the next (default: 1)")
       ->type_name("S")
-      ->check(CLI::Range(0.05, kLongestInterval));
+      ->check([](const std::string& text) { return checkSeconds(text, 0.05, kLongestInterval); });
   command->footer(
       "\nThe service tells what waits and what was counted, the recorder in the state directory which sessions are "
       "open\n"
