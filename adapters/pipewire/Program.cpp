@@ -153,12 +153,14 @@ void Program::carryOut() {
 // The first, and then whenever they have doubled.
 void Program::tellLosses() {
   const Reporter::Counts& counts = reporter_->counts();
-  const std::uint64_t losses = counts.lost + counts.leftOut;
+  const std::uint64_t refused = reporter_->refused();
+  const std::uint64_t losses = counts.lost + counts.leftOut + refused;
   if (losses == 0 || losses < 2 * toldLosses_) return;
   toldLosses_ = losses;
+  const std::string why = counts.lastRefusal.empty() ? reporter_->lastError() : counts.lastRefusal;
   log_.write(LogLevel::Default, "not reported so far: " + std::to_string(counts.lost) + " messages, " +
-                                    std::to_string(counts.leftOut) + " sessions while no service answered" +
-                                    (counts.lastRefusal.empty() ? "" : " (" + counts.lastRefusal + ")"));
+                                    std::to_string(counts.leftOut) + " sessions while no service answered, " +
+                                    std::to_string(refused) + " requests that it refused (" + why + ")");
 }
 
 void Program::stop(int status) {

@@ -20,6 +20,13 @@ tarnreporting_value valueOf(const FieldValue& value) {
   return tarnreporting_text(text.data(), static_cast<std::uint32_t>(text.size()));
 }
 
+tarnreporting_state stateOf(tarnreporting_client* client) {
+  tarnreporting_state state{};
+  state.size = sizeof state;
+  tarnreporting_client_state(client, &state);
+  return state;
+}
+
 // Keys are texts of the program, with a zero at their ends.
 std::vector<tarnreporting_field> fieldsOf(const Fields& fields) {
   std::vector<tarnreporting_field> made;
@@ -144,10 +151,17 @@ void Reporter::send(const Session& session, const PostMessage& post) {
   }
 }
 
+std::uint64_t Reporter::refused() const {
+  return stateOf(client_).refused;
+}
+
+std::string Reporter::lastError() const {
+  const tarnreporting_state state = stateOf(client_);
+  return state.last_error;
+}
+
 Reporter::Standing Reporter::standing() const {
-  tarnreporting_state state{};
-  state.size = sizeof state;
-  tarnreporting_client_state(client_, &state);
+  const tarnreporting_state state = stateOf(client_);
   const bool isConnected = state.connection == TARNREPORTING_CONNECTED;
   return {isConnected, state.connections + (isConnected ? std::uint64_t{0} : std::uint64_t{1})};
 }

@@ -48,6 +48,10 @@ class Reporter {
   // Waits at most so long for what was posted to be taken. Messages that nobody took.
   std::uint64_t close(std::uint32_t milliseconds);
   const Counts& counts() const { return counts_; }
+  // What the service refused so far: sessions, shapes and messages.
+  std::uint64_t refused() const;
+  // What went wrong last between the client and the service; empty when nothing did.
+  std::string lastError() const;
 
  private:
   struct Session {

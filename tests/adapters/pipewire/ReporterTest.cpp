@@ -60,6 +60,13 @@ TEST(PipeWireReporter, WhatConcernsAStreamThatIsNotKnownIsNothing) {
   EXPECT_EQ(reporter.counts().lost, 0U);
 }
 
+TEST(PipeWireReporter, NobodyRefusesWhereNobodyAnswers) {
+  Reporter reporter;
+  ASSERT_TRUE(reporter.open(kNobody).ok());
+  reporter.carryOut({sessionOf(1), messageOf(1)});
+  EXPECT_EQ(reporter.refused(), 0U);
+}
+
 TEST(PipeWireReporter, APathThatIsTooLongIsAnError) {
   Reporter reporter;
   EXPECT_TRUE(reporter.open(std::string(200, 'x')).failed());

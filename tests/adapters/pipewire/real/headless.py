@@ -95,9 +95,9 @@ class Machine:
             self.manager = self.spawn("wireplumber", **quiet)
             need(eventually(lambda: self.default_sink() == "speaker"), "WirePlumber doesn't come up")
 
-    def start_service(self):
+    def start_service(self, *words):
         self.service = self.spawn(self.daemon, "--socket", self.socket, "--state-dir", self.state,
-                                  "--log-level", "error")
+                                  "--log-level", "error", *words)
         need(eventually(lambda: os.path.exists(self.socket) and self.ctl("status").returncode == 0))
 
     def start_adapter(self, *words):

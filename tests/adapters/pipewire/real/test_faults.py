@@ -62,6 +62,15 @@ class Faults(Headless):
         self.finish(self.streamer("late", 1))
         self.one("late")
 
+    def test_what_the_service_refuses_is_told_with_its_words(self):
+        config = self.write("narrow.toml", "[limits]\nsessions_per_connection = 1\n")
+        self.start_service("--config", config)
+        self.start_pipewire()
+        self.start_adapter()
+        self.assertTrue(eventually(lambda: "looking at PipeWire" in self.adapter_log()))
+        self.finish(self.streamer("one", 3), self.streamer("two", 3))
+        self.assertTrue(eventually(lambda: "over quota" in self.adapter_log()), self.adapter_log())
+
     def test_an_adapter_that_ends_ends_its_sessions(self):
         self.start()
         self.streamer("cut", 60)
