@@ -275,13 +275,7 @@ std::uint64_t KeyList::combineHash(std::uint64_t hash, std::uint64_t keyHash) no
 }
 
 KeyList KeyList::appending(const Key& key) const {
-  if (KeyListBody* const known = body_ == nullptr ? nullptr : extendedBefore(*body_, key)) return KeyList(known);
-  const std::span<const Key> head(body_ == nullptr ? nullptr : body_->keys(), size());
-  KeyListBody* const made = internList(head, &key, combineHash(hash(), key.hash()));
-  if (body_ != nullptr) {
-    rememberExtended(*body_, made);
-  }
-  return KeyList(made);
+  return KeyList(detail::extendKeyList(body_, key));
 }
 
 KeyList KeyList::removing(std::size_t index) const {
@@ -291,6 +285,14 @@ KeyList KeyList::removing(std::size_t index) const {
 }
 
 namespace detail {
+
+KeyListBody* extendKeyList(KeyListBody* body, const Key& key) {
+  if (body == nullptr) return internList({}, &key, KeyList::combineHash(0, key.hash()));
+  if (KeyListBody* const known = extendedBefore(*body, key)) return known;
+  KeyListBody* const made = internList({body->keys(), body->count}, &key, KeyList::combineHash(body->hash, key.hash()));
+  rememberExtended(*body, made);
+  return made;
+}
 
 std::size_t indexInKeyList(const KeyListBody* body, const Key& key) noexcept {
   if (body == nullptr) return KeyList::npos;

@@ -44,6 +44,14 @@ inline void retainKeyList(KeyListBody* body) noexcept {
 // One holder less; the last one takes the list out of the table, under its lock, and frees it. Also what it was
 // extended to, if nobody else holds that: in a loop, so that a long chain of lists doesn't recurse.
 void releaseKeyList(KeyListBody* body) noexcept;
+// Holds one reference.
+struct ReleaseKeyList {
+  void operator()(KeyListBody* body) const noexcept { releaseKeyList(body); }
+};
+using OwnKeyList = std::unique_ptr<KeyListBody, ReleaseKeyList>;
+// The list with one more key at its end, which is not in it yet; the caller has one reference to it. Null: the empty
+// list.
+KeyListBody* extendKeyList(KeyListBody* body, const Key& key);
 // Position of the key, KeyList::npos without one or without a list. Up to 16 keys are looked at one by one, which is
 // quicker than an index; a key by its address, a text by its characters.
 std::size_t indexInKeyList(const KeyListBody* body, const Key& key) noexcept;

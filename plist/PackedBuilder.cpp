@@ -1,11 +1,45 @@
 #include "plist/PackedBuilder.h"
 
 #include <algorithm>
+#include <cstring>
 
 #include "plist/KeyListBody.h"
 #include "plist/Packed.h"
 
 namespace tarn::plist {
+
+namespace {
+
+// Beyond that, entries are set one by one.
+constexpr std::size_t kBytesInOneStep = 128;
+
+// Packed bytes of the entries when they can be added to this block in one step; 0 when they can't.
+std::size_t sizeInOneStep(const detail::Body* body, std::span<const Dictionary::Entry> entries) noexcept {
+  if (body == nullptr) return 0;
+  std::size_t bytes = 0;
+  for (const Dictionary::Entry& entry : entries) {
+    const std::size_t size = Packed::sizeOf(entry.value);
+    const bool isContainer = entry.value.kind() == Kind::Array || entry.value.kind() == Kind::Dictionary;
+    if (size == 0 || isContainer || detail::indexInKeyList(body->keys, entry.key) != KeyList::npos) return 0;
+    bytes += size;
+  }
+  return bytes <= kBytesInOneStep ? bytes : 0;
+}
+
+// A block of its own with the same entries, and room for so many bytes, of which those at the end aren't written.
+detail::Body* copyOf(const detail::Body& body, std::size_t bytes) {
+  detail::Body* const copy = detail::makeBody(bytes);
+  copy->keys = body.keys;
+  detail::retainKeyList(copy->keys);
+  std::memcpy(copy->data(), body.data(), body.bytes);
+  if (body.holdsContainers != 0) {
+    copy->holdsContainers = 1;
+    detail::retainContainers(copy->data(), copy->data() + body.bytes);
+  }
+  return copy;
+}
+
+}  // namespace
 
 std::optional<KeyList> KeyListCache::find(std::uint64_t hash, std::span<const std::string_view> texts) {
   if (texts.size() > kLongestKept) return KeyList::make(texts);
@@ -107,6 +141,33 @@ Array PackedBuilder::finishArray() {
   body->count = levels_.back().count;
   levels_.pop_back();
   return Array(body);
+}
+
+void PackedBuilder::setEntries(Dictionary& dictionary, std::span<const Dictionary::Entry> entries) {
+  detail::Body*& body = dictionary.body_;
+  const std::size_t bytes = sizeInOneStep(body, entries);
+  if (bytes == 0) {
+    for (const Dictionary::Entry& entry : entries) {
+      dictionary.set(entry.key, entry.value);
+    }
+    return;
+  }
+  detail::OwnKeyList list;
+  for (const Dictionary::Entry& entry : entries) {
+    list.reset(detail::extendKeyList(list ? list.get() : body->keys, entry.key));
+  }
+  const std::size_t before = body->bytes;
+  if (detail::isShared(body)) {
+    Dictionary copy(copyOf(*body, before + bytes));
+    std::swap(body, copy.body_);
+  } else {
+    body = detail::growBody(body, before + bytes);
+  }
+  std::byte* to = body->data() + before;
+  for (const Dictionary::Entry& entry : entries) {
+    to = Packed::write(to, entry.value);
+  }
+  detail::releaseKeyList(std::exchange(body->keys, list.release()));
 }
 
 void PackedBuilder::reset() noexcept {

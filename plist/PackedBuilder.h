@@ -57,6 +57,10 @@ class PackedBuilder {
   Dictionary finishDictionary(const KeyList& keys);
   // Closes the open container as an array.
   Array finishArray();
+  // What Dictionary::set() of one after the other does, for who adds the same few entries to every message: when none
+  // of the keys is there yet, the dictionary has entries, and the values are small and no containers, its block grows
+  // once. The keys are all different, and no value looks into the dictionary itself. Needs no builder.
+  static void setEntries(Dictionary& dictionary, std::span<const Dictionary::Entry> entries);
   // Drops everything that is open, for a decoder that gives up in the middle. The scratch space is kept.
   void reset() noexcept;
 

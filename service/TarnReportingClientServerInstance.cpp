@@ -133,15 +133,16 @@ void TarnReportingClientServerInstance::startReportingSessionForID(std::int64_t 
 void TarnReportingClientServerInstance::sendMessage(plist::Dictionary message, std::uint32_t category,
                                                     std::uint16_t type, platform::ReporterIDs reporterIDs,
                                                     platform::Reply<> reply) {
-  TarnReportingMessageDelivery sent(std::move(message), category, type, std::move(reporterIDs), std::move(reply),
-                                    TarnReportingMessageAccount(delegate_));
-  if (sent.isForWhoeverRuns() && TarnReportingUtilityIsInternalBuild()) {
+  TarnReportingMessageAccount account(delegate_);
+  if ((!reporterIDs || reporterIDs->empty()) && TarnReportingUtilityIsInternalBuild()) {
     // Workers of internal builds tell by this key that the message came without a session.
     if (const auto service = delegate_.lock(); service && service->isReportingEnabled()) {
-      sent.add("sendSingleMessage", true);
+      message.set("sendSingleMessage", true);
     }
   }
-  onServerQueue([self = shared_from_this(), delivery = std::move(sent)]() mutable {
+  onServerQueue([self = shared_from_this(),
+                 delivery = TarnReportingMessageDelivery(std::move(message), category, type, std::move(reporterIDs),
+                                                         std::move(reply), std::move(account))]() mutable {
     const auto signpost = operation("sendMessage", {"category", delivery.category()});
     delivery.begin(self->processIdentifier_, self->delegate_);
   });

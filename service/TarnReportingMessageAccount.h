@@ -17,19 +17,21 @@ class TarnReportingMessageAccount {
 
   explicit TarnReportingMessageAccount(Service service) noexcept : service_(std::move(service)) {}
   TarnReportingMessageAccount(TarnReportingMessageAccount&& other) noexcept
-      : service_(std::exchange(other.service_, {})) {}
+      : service_(std::move(other.service_)), isOpen_(std::exchange(other.isOpen_, false)) {}
   TarnReportingMessageAccount& operator=(TarnReportingMessageAccount&&) = delete;
   ~TarnReportingMessageAccount() { close(TarnReportingOutcome::Refused); }
 
   // Counts the message. Later calls do nothing.
   void close(TarnReportingOutcome outcome) {
-    if (const auto service = std::exchange(service_, {}).lock()) {
+    if (!std::exchange(isOpen_, false)) return;
+    if (const auto service = service_.lock()) {
       service->countMessage(outcome);
     }
   }
 
  private:
-  Service service_;  // empty once it is counted
+  Service service_;
+  bool isOpen_ = true;  // not counted yet
 };
 
 }  // namespace tarn

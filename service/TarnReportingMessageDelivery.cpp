@@ -52,7 +52,18 @@ void TarnReportingMessageDelivery::begin(std::int32_t processIdentifier,
     reply_(platform::RemoteError{kErrorDomain, kReportingDisabled, "reporting is disabled"});
     return;
   }
-  proceed(*delegate, service);
+  if (search_.reporterIDs && search_.reporterIDs->size() == 1) {
+    deliverToOne(*delegate);
+  } else {
+    proceed(*delegate, service);
+  }
+}
+
+void TarnReportingMessageDelivery::deliverToOne(TarnReportingServiceDelegateProtocol& service) {
+  if (const auto session = service.findReportingSessionForID(search_.reporterIDs->front())) {
+    handOver(session, true);
+  }
+  finish();
 }
 
 void TarnReportingMessageDelivery::proceed(TarnReportingServiceDelegateProtocol& service,
@@ -72,6 +83,10 @@ void TarnReportingMessageDelivery::proceed(TarnReportingServiceDelegateProtocol&
       return;
     }
   }
+  finish();
+}
+
+void TarnReportingMessageDelivery::finish() {
   account_.close(outcome_);
   reply_(std::nullopt);
 }

@@ -38,8 +38,6 @@ class TarnReportingMessageDelivery {
 
   // For the operation's signpost.
   std::uint32_t category() const noexcept { return category_; }
-  // Before begin(): one more entry of the message.
-  void add(std::string_view key, const plist::ValueView& value) { message_.set(plist::Key(key), value); }
   // No list and an empty one mean the same.
   bool isForWhoeverRuns() const { return !search_.reporterIDs || search_.reporterIDs->empty(); }
   // Delivers it, and replies at the end: with an error where the service is gone or reporting is disabled. The error is
@@ -52,8 +50,12 @@ class TarnReportingMessageDelivery {
   // One slice: goes on with the search, then with the handing over, until it is done or others are to have their turn.
   void proceed(TarnReportingServiceDelegateProtocol& service,
                const std::weak_ptr<TarnReportingServiceDelegateProtocol>& delegate);
+  // What nearly every message is: for one session, which is found and served at once and without a list.
+  void deliverToOne(TarnReportingServiceDelegateProtocol& service);
   // Hands itself over as the work of the next slice; nothing of this object may be touched afterwards.
   void giveWay(const std::weak_ptr<TarnReportingServiceDelegateProtocol>& delegate);
+  // Counts the message and replies.
+  void finish();
   // Makes the session's record and calls its intake. The last one's record takes the message itself.
   void handOver(const std::shared_ptr<TarnReportingSession>& session, bool isLast);
 

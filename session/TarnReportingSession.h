@@ -153,6 +153,8 @@ class TarnReportingSession : public std::enable_shared_from_this<TarnReportingSe
                        const Opener& opener);
   // The process's lists, derived from the table on first use.
   static const TarnReportingSessionWorkerClasses& workerClasses();
+  // The two steps of the intake in one, as far as that goes.
+  void addTagAndAppName(TarnReportingSessionMessage& message) const;
   // Tells the chronicle what became known.
   void describe();
   // A stamped and tagged marker of this type; `method` is "start" or "stop" and the end of its keys.

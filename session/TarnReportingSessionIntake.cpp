@@ -6,6 +6,7 @@
 #include "platform/Clock.h"
 #include "platform/Facilities.h"
 #include "platform/TracePoints.h"
+#include "plist/PackedBuilder.h"
 #include "plist/Value.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
@@ -34,6 +35,12 @@ std::string withoutBlanks(std::string_view key) {
   return replaced;
 }
 
+std::string tagOf(const TarnReportingSessionMessage& message) {
+  std::string tag = TarnReportingUtilityCategoryString(message.category());
+  tag += TarnReportingUtilityTypeString(message.type());
+  return tag;
+}
+
 }  // namespace
 
 std::size_t TarnReportingSession::sendMessage(const MessagePointer& message, platform::Reply<> reply) {
@@ -43,8 +50,7 @@ std::size_t TarnReportingSession::sendMessage(const MessagePointer& message, pla
   ++totalMessageCount_;
   addMissingDates(*message);
   removeWhiteSpaceFromKeys(*message);
-  addAudioMessageTag(*message);
-  addAppName(*message);
+  addTagAndAppName(*message);
   TarnReportingFacilities().tracePoints.emit(kTraceMessage, reporterID_);
   message->setIsSessionStarted(started_);
   message->setIsRedundant(messageIsRedundant(*message));
@@ -104,10 +110,23 @@ void TarnReportingSession::removeWhiteSpaceFromKeys(TarnReportingSessionMessage&
   payload = plist::Dictionary::fromEntries(entries);
 }
 
+// Nearly every message comes without an application of its own: then its block grows once for both.
+void TarnReportingSession::addTagAndAppName(TarnReportingSessionMessage& message) const {
+  const plist::ValueView application = configuration_.get(keys::kHostApplicationDisplayID);
+  if (!application.isText() || message.message().contains(keys::kHostApplicationDisplayID)) {
+    addAudioMessageTag(message);
+    addAppName(message);
+    return;
+  }
+  const std::string tag = tagOf(message);
+  const MutexLock guard(message);
+  const std::array<plist::Dictionary::Entry, 2> added{
+      {{keys::kAudioTag, tag}, {keys::kHostApplicationDisplayID, application}}};
+  plist::PackedBuilder::setEntries(message.mutableMessage(), added);
+}
+
 void TarnReportingSession::addAudioMessageTag(TarnReportingSessionMessage& message) {
-  std::string tag = TarnReportingUtilityCategoryString(message.category());
-  tag += TarnReportingUtilityTypeString(message.type());
-  message.mutableMessage().set(keys::kAudioTag, tag);
+  message.mutableMessage().set(keys::kAudioTag, tagOf(message));
 }
 
 void TarnReportingSession::addAppName(TarnReportingSessionMessage& message) const {
@@ -116,7 +135,7 @@ void TarnReportingSession::addAppName(TarnReportingSessionMessage& message) cons
   const plist::ValueView present = payload.get(keys::kHostApplicationDisplayID);
   if (present && !(present == plist::ValueView("Unknown"))) return;
   const plist::ValueView known = configuration_.get(keys::kHostApplicationDisplayID);
-  if (known.isText()) {  // as it lies there: every message comes by
+  if (known.isText()) {  // as it lies there
     payload.set(keys::kHostApplicationDisplayID, known);
   } else {
     payload.set(keys::kHostApplicationDisplayID, TarnReportingUtilityRetrieveAppName(configuration_));

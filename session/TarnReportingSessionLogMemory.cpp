@@ -60,9 +60,10 @@ TarnReportingSessionLogMemory::Usage TarnReportingSessionLogMemory::usage() cons
 std::size_t TarnReportingSessionLogMemory::costOf(const TarnReportingSessionMessage& record) noexcept {
   const plist::Dictionary& payload = record.message();
   std::size_t cost = kRecordBytes + kBlockBytes + payload.storageBytes();
-  std::uint64_t& known = knownShapes_[payload.keysHash() % kKnownShapes];
-  if (known != payload.keysHash()) {
-    known = payload.keysHash();
+  const std::uint64_t shape = payload.keysHash();
+  std::uint64_t& known = knownShapes_[shape % kKnownShapes];
+  if (known != shape) {
+    known = shape;
     const plist::KeyList keys = payload.keys();
     for (std::size_t index = 0; index < keys.size(); ++index) {
       cost += kKeyBytes + keys[index].text().size();

@@ -28,6 +28,10 @@ const TarnReportingSessionMessage::DestinationWorkers& TarnReportingSessionMessa
   return destinationWorkers_ ? *destinationWorkers_ : kEveryone;
 }
 
+bool TarnReportingSessionMessage::isAddressedTo(std::string_view workerClass) const noexcept {
+  return std::find(destinationWorkers_->begin(), destinationWorkers_->end(), workerClass) != destinationWorkers_->end();
+}
+
 void TarnReportingSessionMessage::setDestinationWorkers(DestinationWorkers workers) {
   destinationWorkers_ = workers.empty() ? nullptr : std::make_unique<const DestinationWorkers>(std::move(workers));
 }

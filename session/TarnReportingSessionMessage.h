@@ -65,6 +65,10 @@ class TARN_CAPABILITY TarnReportingSessionMessage {
 
   // The classes whose workers alone handle the message; empty means every consumer.
   const DestinationWorkers& destinationWorkers() const noexcept;
+  // Whether the workers of this class are among them.
+  bool isFor(std::string_view workerClass) const noexcept {
+    return destinationWorkers_ == nullptr || isAddressedTo(workerClass);
+  }
   // An empty list addresses everyone again. Few messages have one, so a record holds a pointer to it.
   void setDestinationWorkers(DestinationWorkers workers);
 
@@ -87,6 +91,9 @@ class TARN_CAPABILITY TarnReportingSessionMessage {
   void unlock() const noexcept TARN_RELEASE();
 
  private:
+  // Of a message with destinations.
+  bool isAddressedTo(std::string_view workerClass) const noexcept;
+
   plist::Dictionary message_;
   std::unique_ptr<const DestinationWorkers> destinationWorkers_;
   const AudioEventCategory category_;

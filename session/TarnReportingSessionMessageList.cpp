@@ -2,14 +2,25 @@
 
 #include <algorithm>
 
+#include "platform/WorkQueue.h"
 #include "service/vocabulary/ProcessState.h"
 #include "service/vocabulary/TarnReportingLog.h"
+#include "service/vocabulary/TarnReportingUtility.h"
 
 namespace tarn {
 
 namespace {
 
 constexpr TarnReportingLogger kLog{TarnReportingSessionCategory, "TarnReportingSessionMessageList"};
+
+// Of writing or reading a page, in units of about a microsecond; its records come to that.
+constexpr std::size_t kPageCost = 8;
+constexpr std::size_t kRecordsPerCost = 4;
+
+// A page takes as long as many messages: whoever sends the one that needs it pays, and others get their turn sooner.
+void charge(std::size_t records) {
+  TarnReportingUtilityGetReportingServerQueue()->spend(kPageCost + records / kRecordsPerCost);
+}
 
 }  // namespace
 
@@ -114,6 +125,13 @@ TarnReportingSessionMessageList::Record TarnReportingSessionMessageList::operato
   return look(index);
 }
 
+TarnReportingSessionMessageList::Record TarnReportingSessionMessageList::readAlone(std::size_t index) const {
+  if (index >= overflowed_) return look(index);
+  const std::size_t part = partOf(index);
+  const std::vector<Record> records = recordsOf(part);
+  return records.empty() ? nullptr : records[index - parts_[part].first];
+}
+
 TarnReportingSessionMessageList::Iterator TarnReportingSessionMessageList::begin() const {
   return Iterator(*this);
 }
@@ -137,9 +155,10 @@ void TarnReportingSessionMessageList::goBack(std::size_t end,
   }
   for (std::size_t part = end > 0 ? partOf(end - 1) + 1 : 0; part > 0; --part) {
     if (!parts_[part - 1].page->contents().mayHave(wants)) continue;
-    const Opened& opened = open(part - 1);
-    for (std::size_t left = std::min(opened.records.size(), end - opened.first); left > 0; --left) {
-      if (!take(opened.first + left - 1, opened.records[left - 1])) return;
+    const std::vector<Record> records = recordsOf(part - 1);
+    const std::size_t first = parts_[part - 1].first;
+    for (std::size_t left = std::min(records.size(), end - first); left > 0; --left) {
+      if (!take(first + left - 1, records[left - 1])) return;
     }
   }
 }
@@ -183,6 +202,19 @@ const TarnReportingSessionMessageList::Opened& TarnReportingSessionMessageList::
   return opened_[0];
 }
 
+std::vector<TarnReportingSessionMessageList::Record> TarnReportingSessionMessageList::recordsOf(
+    std::size_t part) const {
+  for (const Opened& opened : opened_) {
+    if (opened.part == part) return opened.records;
+  }
+  Part& read = parts_[part];
+  if (read.isLost) return {};
+  charge(read.page->size());
+  std::vector<Record> records = read.page->read();
+  read.isLost = records.empty();
+  return records;
+}
+
 // Has the page of records that were changed written anew. When there is no room for it, it stays in memory.
 void TarnReportingSessionMessageList::closePart(Opened& opened) const {
   if (!opened.isChanged) return;
@@ -213,6 +245,7 @@ bool TarnReportingSessionMessageList::moveOldest() {
   if (pins_ > 0 || !recent_ || recent_->empty()) return false;
   const Chunk chunk = firstChunk_ < chunks_.size() ? chunks_[firstChunk_] : openChunk_;
   const auto end = recent_->begin() + static_cast<std::ptrdiff_t>(chunk.records);
+  charge(chunk.records);
   Page::Maker maker(chunk.bytes);
   std::for_each(recent_->begin(), end, [&](const Record& record) { maker.add(*record); });
   auto page = maker.finish(*memory_->store_, memory_->pageCounts_);

@@ -70,6 +70,8 @@ class TarnReportingSessionMessageList {
   // a page, at random one a record.
   Record operator[](std::size_t index) const;
   Record at(std::size_t index) const { return (*this)[index]; }
+  // For who needs this one alone: its page isn't kept open, which a thousand sessions at a time have no memory for.
+  Record readAlone(std::size_t index) const;
   // Of a list that isn't empty.
   Record front() const { return (*this)[0]; }
   Record back() const { return (*this)[size() - 1]; }
@@ -98,8 +100,7 @@ class TarnReportingSessionMessageList {
   // wants(kind) is true for none of the kinds are passed over. Nothing may be appended to this list meanwhile.
   void goBack(std::size_t end, const std::function<bool(TarnReportingSessionMessage::Kind)>& wants,
               const std::function<bool(std::size_t, const Record&)>& take) const;
-  // How often records of pages were changed in place. Who keeps a record that was read back looks here whether it may
-  // be stale.
+  // How often records of pages were changed in place: by it, whoever keeps one that was read back knows a stale one.
   std::uint64_t changes() const noexcept { return changes_; }
 
   // The first so many records lie in pages.
@@ -137,6 +138,8 @@ class TarnReportingSessionMessageList {
   const Record& look(std::size_t index) const;
   // The part of a record below overflowed().
   std::size_t partOf(std::size_t index) const noexcept;
+  // Those of an open page, or read for the caller alone; none of a lost one.
+  std::vector<Record> recordsOf(std::size_t part) const;
   // Reads the part's page unless it is one of the two that are open; an empty one when that is lost.
   const Opened& open(std::size_t part) const;
   // Writes a changed page anew.

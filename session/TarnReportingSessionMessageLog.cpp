@@ -76,7 +76,7 @@ const TarnReportingSessionMessage* TarnReportingSessionMessageLog::newest(AudioE
     body.forgetKept();
   }
   if (newest.kept) return newest.kept.get();
-  body.looked = body.messages[newest.index];
+  body.looked = body.messages.readAlone(newest.index);
   if (body.looked && body.kept < kMostKept) {
     newest.kept = body.looked;
     ++body.kept;
@@ -98,7 +98,9 @@ void TarnReportingSessionMessageLog::Body::lookFor(const Newest& sought) {
   messages.goBack(unseen, isMissing, [&](std::size_t index, const Record& record) {
     Newest& ofTheKind = newest[record->kind()];
     if (ofTheKind.index == kNone) {
-      ofTheKind = {index, record.get(), nullptr};
+      const bool isKept = index < messages.overflowed() && kept < kMostKept;
+      ofTheKind = {index, record.get(), isKept ? record : nullptr};
+      kept += isKept ? 1 : 0;
     }
     unseen = index;
     return sought.index == kNone;

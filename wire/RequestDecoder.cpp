@@ -1,5 +1,6 @@
 #include "wire/RequestDecoder.h"
 
+#include <array>
 #include <limits>
 #include <new>
 #include <utility>
@@ -31,6 +32,9 @@ class RequestPass {
   bool readID();
   bool readOperation();
   bool readArguments();
+  // The arguments of one operation, so that each is read into its member without asking what it is.
+  template <Operation kOperation>
+  static bool readArgumentsOf([[maybe_unused]] RequestPass& pass);
   bool readEnd();
   // Each fails with `expected` where something of another kind stands.
   bool read(std::int64_t& number, const char* expected);
@@ -104,12 +108,21 @@ bool RequestPass::readOperation() {
   return items_ - 2 == rowOf(*operation).arguments.size() || badArgument("wrong number of arguments");
 }
 
-bool RequestPass::readArguments() {
-  for (const Argument argument : rowOf(request_.operation).arguments) {
-    const ArgumentRow& row = rowOf(argument);
-    if (!std::visit([&](auto member) { return read(request_.*member, row.expected); }, row.member)) return false;
+template <Operation kOperation>
+bool RequestPass::readArgumentsOf([[maybe_unused]] RequestPass& pass) {
+  static constexpr ArgumentList kList = rowOf(kOperation).arguments;
+  return [&]<std::size_t... kIndex>(std::index_sequence<kIndex...>) {
+    return (pass.read(argumentIn<kList[kIndex]>(pass.request_), rowOf(kList[kIndex]).expected) && ...);
   }
-  return true;
+  (std::make_index_sequence<kList.size()>());
+}
+
+bool RequestPass::readArguments() {
+  static constexpr auto kReaders = []<std::size_t... kIndex>(std::index_sequence<kIndex...>) {
+    return std::array{&RequestPass::readArgumentsOf<kOperations[kIndex].operation>...};
+  }
+  (std::make_index_sequence<kOperations.size()>());
+  return kReaders[operationIndex(numberOf(request_.operation))](*this);
 }
 
 bool RequestPass::readEnd() {

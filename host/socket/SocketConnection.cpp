@@ -161,11 +161,13 @@ ShareHolder::Turn SocketConnection::takeTurn(std::int64_t credit) {
     watch(watchedEvents_ | EPOLLIN);
   }
   lane_.beginTurn(credit);
+  mayTake_ = true;  // whoever gives the turns has asked just now
   bool more = true;
   while (more && lane_.hasTurn()) {
     more = serveNext();
     if (heldRequest_) break;
   }
+  mayTake_ = false;
   countSessions();
   if (!more) {
     const std::size_t half = state_ == State::Open ? frames_.pendingBytes() : 0;
@@ -213,6 +215,7 @@ void SocketConnection::finishWork() {
 
 // A piece that fails has taken its request's reply along, which refused it.
 void SocketConnection::runLane() {
+  mayTake_ = false;
   MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, [this] { host_.loop.queue()->runLane(lane_); });
 }
 

@@ -203,6 +203,7 @@ class SocketConnection final : public platform::Connection,
   std::shared_ptr<ConnectionRings> rings_;           // once it has any
   std::optional<wire::DecodedRequest> heldRequest_;  // the head request while the gate is shut
   std::size_t heldBytes_ = 0;                        // of its frame
+  bool mayTake_ = false;                             // takesFrom() said so in this turn, and no work was done since
   bool handedOver_ = false;                          // the request that is served, and its reply with it
   std::string refusal_;                              // the answer to every request; empty: they are served
   // What it takes of its user's share.

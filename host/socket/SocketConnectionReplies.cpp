@@ -151,7 +151,9 @@ void SocketConnection::flush() {
   } else if (output_.stalled()) {
     watch(watchedEvents_ | EPOLLOUT);
   } else {
-    watch(watchedEvents_ & ~std::uint32_t{EPOLLOUT});
+    if ((watchedEvents_ & EPOLLOUT) != 0) {
+      watch(watchedEvents_ & ~std::uint32_t{EPOLLOUT});
+    }
     if (unsent != 0) {
       flushAsked_ = true;
       host_.loop.flushLater(shared_from_this());

@@ -58,7 +58,7 @@ void SocketConnection::takeRequest(wire::DecodedRequest& request, std::size_t fr
     serveRingOperation(request);
     return;
   }
-  if (!host_.takesFrom(&party())) {
+  if (!std::exchange(mayTake_, false) && !host_.takesFrom(&party())) {
     hold(request, frameBytes);
     return;
   }

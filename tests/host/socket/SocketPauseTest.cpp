@@ -1,6 +1,8 @@
 // What happens while requests may not be taken.
 
 #include <future>
+#include <string>
+#include <vector>
 
 #include "tests/host/socket/SocketFixture.h"
 
@@ -48,6 +50,20 @@ TEST_F(SocketPauseTest, StatusOfOthersIsAnsweredWhilePausedAndNewClientsAreAccep
   EXPECT_TRUE(late.status());
   EXPECT_FALSE(client.readable(0));
   resumeRequests();
+  EXPECT_TRUE(client.reply());
+}
+
+TEST_F(SocketPauseTest, RequestAfterOneThatShutTheGateIsHeld) {
+  serve();
+  running_.onQueue([this] { host_->gate.setPauseSource([this] { return paused && !service_->events.empty(); }); });
+  paused = true;
+  TestClient client(path_);
+  client.send(encoded(1, requestOf(Operation::CreateReportingSession, 7)) +
+              encoded(2, requestOf(Operation::CreateReportingSession, 8)));
+  ASSERT_TRUE(eventually([&] { return held() == 1; }));
+  EXPECT_EQ(events(), std::vector<std::string>{"1 createReportingSession 7"});
+  resumeRequests();
+  EXPECT_TRUE(client.reply());
   EXPECT_TRUE(client.reply());
 }
 

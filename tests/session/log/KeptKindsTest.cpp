@@ -1,6 +1,7 @@
 // The look-up of the newest message of a kind, when messages lie in pages: what is read back, and what is kept of it.
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <cstdint>
 #include <memory>
 #include <random>
@@ -8,6 +9,7 @@
 
 #include "session/TarnReportingSessionMessageLog.h"
 #include "tests/session/log/MessageListFixture.h"
+#include "tests/support/HeapUse.h"
 #include "tests/support/Seeds.h"
 
 namespace tarn {
@@ -227,6 +229,44 @@ TEST_F(KeptKinds, FirstMessageInMemoryIsLetGoWhenItIsMoved) {
   EXPECT_EQ(log.newest(static_cast<AudioEventCategory>(1), AudioEventType::State), record.lock().get());
   log.append(kilobyte(16, 16));
   EXPECT_TRUE(record.expired());
+}
+
+class LookUpInALargePage : public KilobyteLists {
+ protected:
+  // A page of a hundred messages, of which the first fifty are the newest of their kinds, and what stays in memory.
+  LookUpInALargePage() {
+    setBounds(800 * kKilobyte, kNoBound);
+    for (int n = 0; n < 900; ++n) {
+      const auto message = kilobyte(n, n);
+      log_.append(std::make_shared<TarnReportingSessionMessage>(message->message(), kind(std::min(n, 50)),
+                                                                AudioEventType::State));
+    }
+    queue_ = platform_.workQueues.find("sys.oxbow.tarnkit.reporting.server");
+  }
+  static AudioEventCategory kind(int number) { return static_cast<AudioEventCategory>(number); }
+
+  TarnReportingSessionMessageLog log_{7};
+  std::shared_ptr<ManualWorkQueue> queue_;
+};
+
+TEST_F(LookUpInALargePage, KeepsTheMessageAndNotItsPage) {
+  ASSERT_GE(log_.messages().overflowed(), 100U);
+  const HeapGrowth heap;
+  ASSERT_NE(log_.newest(kind(5), AudioEventType::State), nullptr);
+  EXPECT_LT(heap.bytes(), 20'000);
+}
+
+TEST_F(LookUpInALargePage, IsPaidForByWhoeverAsks) {
+  const std::size_t before = queue_->spent();
+  ASSERT_NE(log_.newest(kind(5), AudioEventType::State), nullptr);
+  EXPECT_EQ(queue_->spent() - before, 33U);
+  ASSERT_NE(log_.newest(kind(5), AudioEventType::State), nullptr);
+  EXPECT_EQ(queue_->spent() - before, 33U);
+}
+
+TEST_F(LookUpInALargePage, OnDiskWasPaidForByWhoeverSentTheNextMessage) {
+  const std::size_t pages = (log_.messages().overflowed() + 99) / 100;
+  EXPECT_EQ(queue_->spent(), pages * 33);
 }
 
 TEST_F(KeptKinds, ClearLetsGoWhatWasLookedUp) {
