@@ -71,10 +71,10 @@ ROOMS = {
     "tools/mutate": (),
     "tools/report": VALUES + ("host/system",) + STORE,
     "tools/ctl/terminal": PROGRAM,
-    "tools/manual": PROGRAM + ("tools/ctl",),
     "tools/ctl": PROGRAM + ("client", "dictionary", "tools/script", "tools/ctl/terminal"),
     "tools/ctl/sessions": PROGRAM + ("tools/ctl", "tools/ctl/terminal", "tools/report", "tools/script"),
     "tools/ctl/views": PROGRAM + ("client", "tools/ctl", "tools/ctl/terminal", "tools/report"),
+    "tools/manual": PROGRAM + ("tools/ctl",),
     # What checks the service shares no code with it, but for the client and the reader of the recorder's file.
     "tests/scenario": VALUES + ("client", "wire", "recorder/store", "recorder/store/reading"),
 }
