@@ -229,6 +229,11 @@ class Headless(unittest.TestCase, Machine):
                          [os.environ[name] for name in ("TARNREPORTINGD", "TARNREPORTINGCTL", "ADAPTER")])
         self.addCleanup(self.close)
 
+    def heard(self, name, message="Playback.Start", count=1):
+        """Waits until so many of these messages of the stream are recorded, so that what comes next is told apart."""
+        self.assertTrue(eventually(lambda: self.sessions(name) and
+                                   len(self.messages(self.sessions(name)[0], message)) >= count), (name, message))
+
     def streamer(self, name, seconds, *words):
         """The tests' own stream, once sound flows."""
         process = self.spawn(os.environ["STREAMER"], name, str(seconds), *words, stdout=subprocess.PIPE, text=True)

@@ -10,8 +10,7 @@ class Faults(Headless):
     def test_pipewire_that_is_killed_ends_its_sessions_then_and_comes_back(self):
         self.start()
         self.streamer("before", 60)
-        self.assertTrue(eventually(lambda: self.sessions("before") and
-                                   self.messages(self.sessions("before")[0], "Playback.Start")))
+        self.heard("before")
         self.end(self.pipewire)
         session = self.one("before")
         [last] = self.messages(session, "Generic.Stop")
@@ -28,8 +27,7 @@ class Faults(Headless):
     def test_a_service_that_is_killed_hears_the_rest_from_where_it_began(self):
         self.start()
         player = self.streamer("lasting", 8)
-        self.assertTrue(eventually(lambda: self.sessions("lasting") and
-                                   self.messages(self.sessions("lasting")[0], "Playback.Start")))
+        self.heard("lasting")
         self.end(self.service)
         self.start_service()
         self.finish(player)
@@ -74,8 +72,7 @@ class Faults(Headless):
     def test_an_adapter_that_ends_ends_its_sessions(self):
         self.start()
         self.streamer("cut", 60)
-        self.assertTrue(eventually(lambda: self.sessions("cut") and
-                                   self.messages(self.sessions("cut")[0], "Playback.Start")))
+        self.heard("cut")
         self.end(self.adapter, signal.SIGTERM)
         self.assertEqual(self.adapter.returncode, 0)
         [last] = self.messages(self.one("cut"), "Generic.Stop")
