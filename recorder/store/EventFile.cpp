@@ -252,6 +252,10 @@ Status EventFile::append(const SessionNote& note) {
   return rollbackAfter(sessions_.write(note, time_.seconds()));
 }
 
+Status EventFile::append(const SessionNote& repeat, std::int64_t repeated) {
+  return rollbackAfter(sessions_.repeat(repeat, repeated, nextId_ - 1));
+}
+
 Status EventFile::append(const StoredEvent& event, bool repeatsPayload, platform::SessionNumber owner) {
   StoredEvent owned = event;
   owned.session = sessions_.rowOf(owner);

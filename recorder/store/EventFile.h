@@ -75,6 +75,8 @@ class EventFile {
   [[nodiscard]] Status endRun(double time);
   // What happened to a session, after the events appended so far; in a transaction.
   [[nodiscard]] Status append(const SessionNote& note);
+  // The same of a message that repeats the one of an event, 0 where that isn't known.
+  [[nodiscard]] Status append(const SessionNote& repeat, std::int64_t repeated);
   // Adds an event under the next id, in a transaction. Texts are looked at during the call only; a time that isn't a
   // number is stored as 0. `repeatsPayload`: its payload is that of the append before. The session is that of `owner`.
   [[nodiscard]] Status append(const StoredEvent& event, bool repeatsPayload, platform::SessionNumber owner);
@@ -103,6 +105,8 @@ class EventFile {
   double seconds() const noexcept { return time_.seconds(); }
   // The id of the last committed event, in this file or in those before it.
   std::int64_t lastId() const noexcept { return lastId_; }
+  // That of the next append(), in a transaction.
+  std::int64_t nextId() const noexcept { return nextId_; }
   // Never two events with one id: the ids of a file that was set aside count too. Only forward.
   void skipTo(std::int64_t lastId) noexcept { lastId_ = std::max(lastId_, lastId); }
   // Ids that were committed and weren't in the file when it was opened: its log was cut or taken away. Told once.

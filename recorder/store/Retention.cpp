@@ -12,6 +12,7 @@ namespace {
 
 // Ids in one deletion, and pages given back in one go: a few milliseconds each.
 constexpr std::int64_t kSliceIds = 256;
+constexpr std::int64_t kSliceRepeats = 1024;
 constexpr std::int64_t kPagesAtOnce = 64;
 // Deleting begins this much below the limit, so that the next commits find free pages and the file doesn't outgrow it.
 constexpr std::int64_t kReserveShare = 16;
@@ -25,6 +26,11 @@ int Retention::prepare(Connection& connection) {
     const char* sql;
   } all[] = {
       {oldest_, "SELECT id FROM event_rows ORDER BY id LIMIT 1"},
+      {oldestRepeat_, "SELECT after_event FROM redundant_messages ORDER BY id LIMIT 1"},
+      {keepLastRepeat_, "INSERT OR REPLACE INTO recorder_state SELECT 'last_repeat', max(id) FROM redundant_messages"},
+      {removeRepeats_,
+       "DELETE FROM redundant_messages WHERE id IN (SELECT id FROM redundant_messages ORDER BY id LIMIT ?2) AND "
+       "after_event < ?1"},
       {pageCount_, "PRAGMA page_count"},
       {freePages_, "PRAGMA freelist_count"},
       {groupTimes_, "SELECT first, seconds FROM event_groups ORDER BY first"},
@@ -49,8 +55,9 @@ int Retention::prepare(Connection& connection) {
 }
 
 void Retention::finalize() noexcept {
-  for (Statement* const statement : {&oldest_, &pageCount_, &freePages_, &groupTimes_, &removeBefore_, &removeTexts_,
-                                     &removeSpans_, &removeTimes_, &removeGroups_, &removeLosses_, &keepHoldsAfter_}) {
+  for (Statement* const statement : {&oldest_, &oldestRepeat_, &keepLastRepeat_, &removeRepeats_, &pageCount_,
+                                     &freePages_, &groupTimes_, &removeBefore_, &removeTexts_, &removeSpans_,
+                                     &removeTimes_, &removeGroups_, &removeLosses_, &keepHoldsAfter_}) {
     statement->finalize();
   }
 }
@@ -63,6 +70,17 @@ int Retention::readOldest(std::int64_t& id, bool& any) {
   }
   oldest_.reset();
   return any || code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+// Repeated messages that came before an event's id, the oldest first. They are in the order of the events that they
+// came after, so a look at the first one tells whether there are any.
+int Retention::removeRepeats(std::int64_t before, bool& removedAny) {
+  int code = oldestRepeat_.step();
+  removedAny = code == SQLITE_ROW && oldestRepeat_.integer(0) < before;
+  oldestRepeat_.reset();
+  if (!removedAny) return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
+  code = keepLastRepeat_.run();
+  return code == SQLITE_OK ? removeRepeats_.bind(1, before).bind(2, kSliceRepeats).run() : code;
 }
 
 // The first id that isn't too old, `atMost` when all before that are; 0 when no group says that anything is.
@@ -131,10 +149,15 @@ int Retention::removeSlice(double now, std::int64_t newest, bool& removedAny, st
   if (code == SQLITE_OK) {
     code = readOldest(oldest, any);
   }
-  if (code != SQLITE_OK || !any) return code;
+  if (code != SQLITE_OK) return code;
+  const bool isTooLarge = usedBytes > limits_.maxBytes - limits_.maxBytes / kReserveShare;
+  if (any || isTooLarge) {
+    code = removeRepeats(any ? oldest : newest + 1, removedAny);
+  }
+  if (code != SQLITE_OK || !any || removedAny) return code;
 
   std::int64_t before = std::min(oldest + kSliceIds, newest + 1);
-  if (usedBytes <= limits_.maxBytes - limits_.maxBytes / kReserveShare) {
+  if (!isTooLarge) {
     code = readAgedBefore(now - limits_.maxAgeSeconds, before, before);
   } else {
     // Of a few large ones at most half, so that no more go than must.

@@ -5,7 +5,8 @@
 // itself came down, free pages are given back to the file system a few at a time.
 //
 // "Oldest" is the lowest id, so what is left has no gaps. An event's age is that of its group, on the recorder's own
-// time and not by the event's; what was recorded before there were groups is as old as the first group.
+// time and not by the event's; what was recorded before there were groups is as old as the first group. The rows of
+// repeated messages go with the events before which they came.
 //
 // Owner: the event file; all calls stand inside its transactions. Threads: the writer's.
 #pragma once
@@ -55,6 +56,8 @@ class Retention {
 
   // The lowest id; `any` is false in an empty file.
   [[nodiscard]] int readOldest(std::int64_t& id, bool& any);
+  // 1024 at the most.
+  [[nodiscard]] int removeRepeats(std::int64_t before, bool& removedAny);
   // Where the events that are too old end, by their groups; at most `atMost`.
   [[nodiscard]] int readAgedBefore(double cutoff, std::int64_t atMost, std::int64_t& before);
   // Removes the events before this id, with their groups and noted losses and with the texts that no later event
@@ -73,6 +76,9 @@ class Retention {
   Connection* connection_ = nullptr;
   // Prepared once for each connection, as they run with every commit.
   Statement oldest_;
+  Statement oldestRepeat_;
+  Statement keepLastRepeat_;
+  Statement removeRepeats_;
   Statement pageCount_;
   Statement freePages_;
   Statement groupTimes_;

@@ -38,7 +38,8 @@ constexpr const char* kGreatest =
     "SELECT max(coalesce((SELECT max(id) FROM runs), 0), coalesce((SELECT value FROM recorder_state WHERE name = "
     "'last_run'), 0)), max(coalesce((SELECT max(id) FROM sessions), 0), coalesce((SELECT value FROM recorder_state "
     "WHERE name = 'last_session'), 0)), max(coalesce((SELECT max(id) FROM periods), 0), coalesce((SELECT value FROM "
-    "recorder_state WHERE name = 'last_period'), 0))";
+    "recorder_state WHERE name = 'last_period'), 0)), max(coalesce((SELECT max(id) FROM redundant_messages), 0), "
+    "coalesce((SELECT value FROM recorder_state WHERE name = 'last_repeat'), 0))";
 
 // Sessions that nobody closed, with their last event, and the last moment that is known of each.
 std::string makeOpen(std::int64_t run) {
@@ -68,8 +69,13 @@ int SessionTable::prepare(Connection& connection) {
     Statement& statement;
     const char* sql;
   } all[] = {
-      {describe_, kDescribe}, {start_, kStart},   {setFirst_, "UPDATE periods SET first_event = ?2 WHERE id = ?1"},
-      {stop_, kStop},         {setEnd_, kSetEnd}, {noteAge_, "INSERT OR REPLACE INTO session_ages VALUES(?1, ?2)"},
+      {describe_, kDescribe},
+      {start_, kStart},
+      {setFirst_, "UPDATE periods SET first_event = ?2 WHERE id = ?1"},
+      {stop_, kStop},
+      {setEnd_, kSetEnd},
+      {noteAge_, "INSERT OR REPLACE INTO session_ages VALUES(?1, ?2)"},
+      {repeat_, "INSERT OR IGNORE INTO redundant_messages VALUES(?1, ?2, ?3, ?4, ?5, ?6, ?7)"},
   };
   for (const auto& [statement, sql] : all) {
     if (const int code = statement.prepare(connection.handle(), sql, true); code != SQLITE_OK) return code;
@@ -79,7 +85,7 @@ int SessionTable::prepare(Connection& connection) {
 }
 
 void SessionTable::finalize() noexcept {
-  for (Statement* const statement : {&describe_, &start_, &setFirst_, &stop_, &setEnd_, &noteAge_}) {
+  for (Statement* const statement : {&describe_, &start_, &setFirst_, &stop_, &setEnd_, &noteAge_, &repeat_}) {
     statement->finalize();
   }
   rolledBack();
@@ -111,6 +117,7 @@ int SessionTable::findIds() {
   run_ = greatest.integer(0) + 1;
   sessions_ = greatest.integer(1);
   periodsBefore_ = greatest.integer(2);
+  repeatsBefore_ = greatest.integer(3);
   return SQLITE_OK;
 }
 
@@ -136,7 +143,7 @@ int SessionTable::endRun(double time) {
 
 // Rows after one that can't be read are looked for from the end.
 int SessionTable::carry(Connection& from, Connection& into) {
-  constexpr const char* kCarried[] = {"runs", "sessions", "periods", "session_ages"};
+  constexpr const char* kCarried[] = {"runs", "sessions", "periods", "session_ages", "redundant_messages"};
   if (!from.isOpen()) return SQLITE_OK;
   for (const char* const table : kCarried) {
     for (const char* const order : {"", " ORDER BY 1 DESC"}) {
@@ -174,6 +181,8 @@ int SessionTable::write(const SessionNote& note, double seconds) {
       return describe(note);
     case What::Started:
       return start(note);
+    case What::Repeated:
+      return repeat(note, 0, 0);
     case What::Stopped:
       code = closePeriod(note);
       return code == SQLITE_OK ? setEnd(rowOf(note.session), &note, platform::SessionEnd::Stopped) : code;
@@ -201,7 +210,7 @@ int SessionTable::describe(const SessionNote& note) {
 }
 
 int SessionTable::start(const SessionNote& note) {
-  const std::int64_t row = periodsBefore_ + note.period;
+  const std::int64_t row = periodsBefore_ + note.number;
   Period& period = periods_[note.session];
   if (period.row != row) {
     period = Period{row};
@@ -209,6 +218,16 @@ int SessionTable::start(const SessionNote& note) {
   forgetLast();
   int code = start_.bind(1, row).bind(2, rowOf(note.session)).bind(3, note.time).run();
   return code == SQLITE_OK ? setEnd(rowOf(note.session), nullptr, {}) : code;
+}
+
+int SessionTable::repeat(const SessionNote& note, std::int64_t event, std::int64_t after) {
+  const auto period = periods_.find(note.session);
+  const plist::ValueView stamp = note.message.get("tarnreporting_timestamp");
+  repeat_.bind(1, repeatsBefore_ + note.number).bind(2, rowOf(note.session)).bind(4, note.time).bind(7, after);
+  period == periods_.end() ? repeat_.bindNull(3) : repeat_.bind(3, period->second.row);
+  stamp.isNumber() || stamp.kind() == plist::Kind::Date ? repeat_.bind(5, stamp.asDouble()) : repeat_.bindNull(5);
+  event == 0 ? repeat_.bindNull(6) : repeat_.bind(6, event);
+  return repeat_.run();
 }
 
 int SessionTable::closePeriod(const SessionNote& note) {

@@ -4,6 +4,7 @@
 //   runs(id, boot, version, started, ended, end_reason)                  one row a run of the service
 //   sessions(id, run, ..., created, ended, end_reason)                   id: what the file gave before + the number
 //   periods(id, session, started, stopped, messages, redundant, first_event, last_event)
+//   redundant_messages(id, session, period, time, stamp, event, after_event)
 //
 // What a note says may be written twice, as after a commit that failed and was in all the same: it says the same then.
 // A row that isn't there, since the file is another one, is made with what the note says. Owner: the event file.
@@ -25,12 +26,13 @@ namespace tarn::recorder {
 
 // Something that happened to a session, as the clients' thread leaves it for the writer.
 struct SessionNote {
-  enum class What { Created, Described, Started, Stopped, Ended };
+  enum class What { Created, Described, Started, Repeated, Stopped, Ended };
   What what = What::Created;
   platform::SessionNumber session = 0;
   double time = 0;               // epoch seconds
   platform::SessionFacts facts;  // Created, Described
-  std::int64_t period = 0;       // Started: its number in this run, from 1
+  std::int64_t number = 0;       // Started, Repeated: of the period or the repeat in this run, from 1
+  plist::Dictionary message;     // Repeated
   std::int64_t messages = 0;     // Stopped
   std::int64_t redundant = 0;    // Stopped
   platform::SessionEnd end{};    // Ended
@@ -61,6 +63,8 @@ class SessionTable {
   [[nodiscard]] int endRun(double time);
   // `seconds` is now, on the recorder's own time. In a transaction, after the events that came before the note.
   [[nodiscard]] int write(const SessionNote& note, double seconds);
+  // A message repeated that of an event (0: it isn't known), and came after another one. In a transaction.
+  [[nodiscard]] int repeat(const SessionNote& note, std::int64_t event, std::int64_t after);
   // The session's row, 0 for nobody's. After beginRun().
   std::int64_t rowOf(platform::SessionNumber session) const noexcept { return session == 0 ? 0 : sessions_ + session; }
   // An event was handed over for it: the first and the last one of a period are kept. In a transaction.
@@ -106,10 +110,12 @@ class SessionTable {
   Statement stop_;
   Statement setEnd_;
   Statement noteAge_;
+  Statement repeat_;
   std::optional<std::int64_t> run_;  // once it is known
   // What was given before this run.
   std::int64_t sessions_ = 0;
   std::int64_t periodsBefore_ = 0;
+  std::int64_t repeatsBefore_ = 0;
   std::unordered_map<platform::SessionNumber, Period> periods_;
   // Closed by what isn't committed yet: open again after a rollback.
   std::vector<std::pair<platform::SessionNumber, Period>> over_;
