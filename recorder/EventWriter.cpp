@@ -174,9 +174,14 @@ Status EventWriter::carryOver() {
   const std::string lost = carrying_->lost().empty() ? "none is known to be lost"
                                                      : std::to_string(countOf(carrying_->lost())) + " are lost (" +
                                                            textOf(carrying_->lost()) + ")";
-  if (carrying_->carried() > 0 || !carrying_->lost().empty()) {
+  const std::int64_t rows = carrying_->leftBehind();
+  if (carrying_->carried() > 0 || !carrying_->lost().empty() || rows > 0) {
     log_.notice("recorder file " + file_.path().string() + " got " + std::to_string(carrying_->carried()) +
-                " events from " + carrying_->from().filename().string() + "; " + lost);
+                " events from " + carrying_->from().filename().string() + "; " + lost +
+                (rows > 0 ? "; " + std::to_string(rows) +
+                                " rows of sessions, their periods or runs were damaged and are"
+                                " left behind"
+                          : std::string()));
   }
   carrying_.reset();
   tidy();

@@ -149,6 +149,7 @@ void EventFile::finalizeStatements() noexcept {
   table_.finalize();
   sessions_.finalize();
   check_.finalize();
+  sessionCheck_.finalize();
   retention_.finalize();
 }
 
@@ -298,8 +299,8 @@ int EventFile::writeGroup() {
   return code;
 }
 
-Status EventFile::carrySessions(Connection& from) {
-  return rollbackAfter(SessionTable::carry(from, connection_));
+Status EventFile::carrySessions(Connection& from, std::int64_t& leftBehind) {
+  return rollbackAfter(SessionTable::carry(from, connection_, leftBehind));
 }
 
 Status EventFile::noteLoss(const IdRange& lost) {
@@ -365,15 +366,7 @@ Status EventFile::commit() {
 }
 
 Status EventFile::verify(std::chrono::steady_clock::time_point deadline) {
-  Status error = check_.isDone() ? check_.begin() : Status();
-  error = error.ok() ? check_.goOn(deadline) : error;
-  if (error.ok() && !check_.lost().empty()) {
-    error = Error{SQLITE_CORRUPT, "damaged: events " + textOf(check_.lost()) + " aren't as they were written"};
-  }
-  if (error.failed()) {
-    check_.finalize();
-  }
-  return error;
+  return verifySome(check_, sessionCheck_, deadline);
 }
 
 Status EventFile::checkpointIfDue() {

@@ -30,6 +30,7 @@
 #include "recorder/store/EventTable.h"
 #include "recorder/store/RecorderTime.h"
 #include "recorder/store/Retention.h"
+#include "recorder/store/SessionCheck.h"
 #include "recorder/store/SessionTable.h"
 #include "recorder/store/Statement.h"
 #include "recorder/store/StoreCheck.h"
@@ -88,9 +89,9 @@ class EventFile {
   // What was carried begins with this id, and whoever reads along goes on after the last one. In a transaction, after
   // the last carry().
   [[nodiscard]] Status noteCarried(std::int64_t first);
-  // Takes over the rows of runs, sessions and periods that another file has, as far as they can be read. In a
-  // transaction, after the last carry().
-  [[nodiscard]] Status carrySessions(Connection& from);
+  // Takes over the rows of runs, sessions, periods and repeated messages that another file has, as far as they can be
+  // read and are as they were written; the others are counted. In a transaction, after the last carry().
+  [[nodiscard]] Status carrySessions(Connection& from, std::int64_t& leftBehind);
   // Removes what retention doesn't keep, until `deadline` at the latest; in a transaction, after its appends.
   [[nodiscard]] Status expire(std::chrono::steady_clock::time_point deadline);
   // Ends the transaction and synchronises it: what was appended is safe when this succeeds.
@@ -123,7 +124,7 @@ class EventFile {
   // damage as an error. A reading error too; then the check starts again.
   [[nodiscard]] Status verify(std::chrono::steady_clock::time_point deadline);
   // Whether the check came to the file's end, or none has begun.
-  bool isVerified() const noexcept { return check_.isDone(); }
+  bool isVerified() const noexcept { return check_.isDone() && sessionCheck_.isDone(); }
 
   // Whether retention has more to remove than the last expire() got to. Another one is due soon then.
   bool hasMoreToExpire() const noexcept { return retention_.hasMore(); }
@@ -172,6 +173,7 @@ class EventFile {
   SessionTable sessions_;
   Retention retention_;
   StoreCheck check_{connection_};
+  SessionCheck sessionCheck_{connection_};  // after that
   RecorderTime time_;
   EventGroup group_;          // of the events since the last one that was full
   std::string groupHashes_;   // while it is written

@@ -3,8 +3,10 @@
 #include <sqlite3.h>
 
 #include <algorithm>
+#include <string>
 
 #include "recorder/store/EventTable.h"
+#include "recorder/store/SessionSums.h"
 
 namespace tarn::recorder {
 
@@ -23,11 +25,15 @@ int Retention::prepare(Connection& connection) {
   connection_ = &connection;
   const struct {
     Statement& statement;
-    const char* sql;
+    std::string sql;
   } all[] = {
       {oldest_, "SELECT id FROM event_rows ORDER BY id LIMIT 1"},
       {oldestRepeat_, "SELECT after_event FROM redundant_messages ORDER BY id LIMIT 1"},
       {keepLastRepeat_, "INSERT OR REPLACE INTO recorder_state SELECT 'last_repeat', max(id) FROM redundant_messages"},
+      {removeRepeatSums_,
+       SessionSums::removeOf(SessionSums::Redundant,
+                             "SELECT id FROM (SELECT id, after_event FROM redundant_messages ORDER BY id LIMIT ?2) "
+                             "WHERE after_event < ?1")},
       {removeRepeats_,
        "DELETE FROM redundant_messages WHERE id IN (SELECT id FROM redundant_messages ORDER BY id LIMIT ?2) AND "
        "after_event < ?1"},
@@ -55,9 +61,9 @@ int Retention::prepare(Connection& connection) {
 }
 
 void Retention::finalize() noexcept {
-  for (Statement* const statement : {&oldest_, &oldestRepeat_, &keepLastRepeat_, &removeRepeats_, &pageCount_,
-                                     &freePages_, &groupTimes_, &removeBefore_, &removeTexts_, &removeSpans_,
-                                     &removeTimes_, &removeGroups_, &removeLosses_, &keepHoldsAfter_}) {
+  for (Statement* const statement : {&oldest_, &oldestRepeat_, &keepLastRepeat_, &removeRepeatSums_, &removeRepeats_,
+                                     &pageCount_, &freePages_, &groupTimes_, &removeBefore_, &removeTexts_,
+                                     &removeSpans_, &removeTimes_, &removeGroups_, &removeLosses_, &keepHoldsAfter_}) {
     statement->finalize();
   }
 }
@@ -80,7 +86,10 @@ int Retention::removeRepeats(std::int64_t before, bool& removedAny) {
   oldestRepeat_.reset();
   if (!removedAny) return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
   code = keepLastRepeat_.run();
-  return code == SQLITE_OK ? removeRepeats_.bind(1, before).bind(2, kSliceRepeats).run() : code;
+  for (Statement* const statement : {&removeRepeatSums_, &removeRepeats_}) {
+    code = code == SQLITE_OK ? statement->bind(1, before).bind(2, kSliceRepeats).run() : code;
+  }
+  return code;
 }
 
 // The first id that isn't too old, `atMost` when all before that are; 0 when no group says that anything is.

@@ -78,6 +78,7 @@ class Retention {
   Statement oldest_;
   Statement oldestRepeat_;
   Statement keepLastRepeat_;
+  Statement removeRepeatSums_;
   Statement removeRepeats_;
   Statement pageCount_;
   Statement freePages_;

@@ -20,6 +20,7 @@
 
 #include "platform/SessionRecords.h"
 #include "recorder/store/Connection.h"
+#include "recorder/store/SessionSums.h"
 #include "recorder/store/Statement.h"
 
 namespace tarn::recorder {
@@ -72,8 +73,9 @@ class SessionTable {
     const bool hasNoPeriod = session == 0 || (session == lastSession_ && lastPeriod_ == nullptr);
     return hasNoPeriod ? 0 /* SQLITE_OK */ : addEvent(session, event);
   }
-  // Copies what can be read of another file's rows. In a transaction of `into`, before beginRun().
-  [[nodiscard]] static int carry(Connection& from, Connection& into);
+  // Copies what can be read of another file's rows, but for those that aren't as their checksums say, which are
+  // counted. In a transaction of `into`, before beginRun().
+  [[nodiscard]] static int carry(Connection& from, Connection& into, std::int64_t& leftBehind);
   // What was written since the last of these two is safe, or isn't there.
   void committed() noexcept { over_.clear(); }
   void rolledBack() noexcept;
@@ -95,6 +97,10 @@ class SessionTable {
   [[nodiscard]] int addEvent(platform::SessionNumber session, std::int64_t event);
   [[nodiscard]] int findIds();
   [[nodiscard]] int closeOlder();
+  // Changes each row of the table whose id (?1) a SELECT tells.
+  [[nodiscard]] int changeEach(SessionSums::Place place, const std::string& ids, const char* change);
+  [[nodiscard]] static int carryTable(Connection& from, Connection& into, const std::string& reading,
+                                      const std::string& table, std::int64_t& leftBehind);
   [[nodiscard]] int describe(const SessionNote& note);
   [[nodiscard]] int start(const SessionNote& note);
   [[nodiscard]] int closePeriod(const SessionNote& note);
@@ -111,6 +117,7 @@ class SessionTable {
   Statement setEnd_;
   Statement noteAge_;
   Statement repeat_;
+  SessionSums sums_;                 // through which every change of a row goes
   std::optional<std::int64_t> run_;  // once it is known
   // What was given before this run.
   std::int64_t sessions_ = 0;

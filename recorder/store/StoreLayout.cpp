@@ -7,6 +7,7 @@
 #include <string>
 #include <string_view>
 
+#include "recorder/store/SessionSums.h"
 #include "recorder/store/Statement.h"
 #include "recorder/store/StoreViews.h"
 
@@ -61,6 +62,7 @@ constexpr Made kLaterTables[] = {
      "CREATE TABLE redundant_messages(id INTEGER PRIMARY KEY, session INTEGER, period INTEGER, time REAL, stamp REAL, "
      "event INTEGER, after_event INTEGER)"},
     {"redundant_of_session", "CREATE INDEX redundant_of_session ON redundant_messages(session)"},
+    {"row_hashes", "CREATE TABLE row_hashes(id INTEGER PRIMARY KEY, hash INTEGER)"},
 };
 
 // The recorder's own notes beside the events, as in the first version. After "holds_after" every id is there, or noted
@@ -163,7 +165,9 @@ Status checkCurrentTables(Connection& connection, std::string& missing) {
 Status completeTables(Connection& connection) {
   std::string missing;
   const Status error = checkCurrentTables(connection, missing);
-  return error.failed() || missing.empty() ? error : makeAtOnce(connection, missing);
+  if (error.failed() || missing.empty()) return error;
+  // What rows without a checksum say now is all that is known of them.
+  return makeAtOnce(connection, missing + SessionSums::sealAll());
 }
 
 // What is right needs no transaction.
@@ -208,6 +212,7 @@ Status prepareConnection(Connection& connection) {
       "PRAGMA journal_mode=WAL; PRAGMA synchronous=FULL;"
       "PRAGMA cache_size=-8192; PRAGMA secure_delete=OFF; PRAGMA trusted_schema=OFF");
   if (code != SQLITE_OK) return connection.errorOf(code);
+  if (const int added = SessionSums::addFunction(connection); added != SQLITE_OK) return connection.errorOf(added);
   const Result<std::string> mode = connection.readText("PRAGMA journal_mode");
   if (mode.failed()) return mode.error;
   if (mode.value != "wal") {

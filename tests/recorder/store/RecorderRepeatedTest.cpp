@@ -1,10 +1,7 @@
 // Rows of messages that repeat earlier ones, where such are kept.
-#include <optional>
-
-#include "recorder/RecorderSessionRecords.h"
 #include "recorder/store/StoreReport.h"
 #include "recorder/store/reading/SessionReader.h"
-#include "tests/recorder/RecorderFixture.h"
+#include "tests/recorder/store/RecordsFixture.h"
 
 namespace tarn::recorder {
 namespace {
@@ -12,29 +9,13 @@ namespace {
 using platform::SessionNumber;
 using Rows = std::vector<std::string>;
 
-thread_local SessionNumber worksFor = 0;
-
-SessionNumber current() noexcept {
-  return worksFor;
-}
-
-SessionNumber enterSession(SessionNumber session) noexcept {
-  return std::exchange(worksFor, session);
-}
-
-class RecorderRepeated : public RecorderFixture {
+class RecorderRepeated : public RecordsFixture {
  protected:
   RecorderRepeated() {
-    options_.sessionOf = current;
     options_.redundant = Redundant::Mark;
     clock_.setEpochSeconds(1000);
   }
-  ~RecorderRepeated() override { worksFor = 0; }
 
-  void begin() {
-    records_.emplace(start(), clock_, enterSession);
-    recorder_->waitUntilOpened();
-  }
   SessionNumber startSession() {
     const SessionNumber session = records_->created({});
     records_->started(session);
@@ -45,14 +26,11 @@ class RecorderRepeated : public RecorderFixture {
   }
   // Both events of a message.
   void send(SessionNumber session, const Dictionary& payload) {
-    const platform::SessionScope scope(&*records_, session);
-    record("sys.oxbow.tarnkit.Playback.Start", payload);
-    record("sys.oxbow.generic.Playback.Start", payload);
+    recordFor(session, "sys.oxbow.tarnkit.Playback.Start", payload);
+    recordFor(session, "sys.oxbow.generic.Playback.Start", payload);
   }
   Rows repeated() { return ask(file(), "SELECT * FROM redundant_messages ORDER BY id"); }
   std::string count() { return askOne(file(), "SELECT count(*) FROM redundant_messages"); }
-
-  std::optional<RecorderSessionRecords> records_;
 };
 
 TEST_F(RecorderRepeated, ARepeatedMessageHasARowWithTheEventThatItRepeats) {
@@ -135,6 +113,8 @@ TEST_F(RecorderRepeated, TheyStayWithinTheSizeWhenNothingElseComes) {
   EXPECT_GT(left, 1000);
   EXPECT_EQ(askOne(file(), "SELECT max(id) FROM redundant_messages"), "40000") << "the oldest went";
   EXPECT_LE(std::filesystem::file_size(file()), (std::uintmax_t{1} << 20) * 3 / 2);
+  stop();
+  EXPECT_TRUE(inspectStore(file()).value.isWhole());
 }
 
 TEST_F(RecorderRepeated, AFileFromBeforeGetsTheTableAndKeepsWhatItHas) {
@@ -142,7 +122,7 @@ TEST_F(RecorderRepeated, AFileFromBeforeGetsTheTableAndKeepsWhatItHas) {
   send(startSession(), message(3, 10));
   ASSERT_TRUE(flush());
   stop();
-  change(file(), "DROP TABLE redundant_messages");
+  change(file(), "DROP TABLE redundant_messages; DROP TABLE row_hashes");
   EXPECT_TRUE(inspectStore(file()).value.isWhole()) << "nothing is wrong with one of before";
   SessionReader reader(file());
   ASSERT_TRUE(reader.open().ok());
