@@ -12,9 +12,7 @@ namespace {
 
 constexpr const char* kSessionColumns =
     "SELECT id, run, reporter, connection, pid, uid, process, application, service_type, service_name, created, ended,"
-    " end_reason FROM sessions AS s";
-constexpr const char* kNeverRan =
-    "end_reason IS 'retyped' AND NOT EXISTS (SELECT 1 FROM periods AS p WHERE p.session = s.id)";
+    " end_reason FROM sessions";
 
 // Ids that newest() looks at first, and how many times more then.
 constexpr std::int64_t kFirstReach = 32;
@@ -37,23 +35,6 @@ SessionRow sessionOf(const Statement& row) {
 PeriodRow periodOf(const Statement& row) {
   return {row.integer(0), row.integer(1), row.real(2),       realOf(row, 3),
           row.integer(4), row.integer(5), integerOf(row, 6), integerOf(row, 7)};
-}
-
-// What narrows a list, but for its limit.
-std::string conditionsOf(const SessionQuery& query) {
-  std::string sql = " WHERE 1";
-  sql.append(query.since ? " AND (ended IS NULL OR ended >= ?1)" : "").append(query.until ? " AND created < ?2" : "");
-  sql.append(query.applicationGlob ? " AND matches_glob(?3, application)" : "");
-  return sql.append(query.open ? " AND ended IS NULL" : "");
-}
-
-// The query outlives the statement's steps.
-void bindTo(const SessionQuery& query, Statement& statement) {
-  statement.bind(1, query.since.value_or(0)).bind(2, query.until.value_or(0));
-  statement.bind(4, static_cast<std::int64_t>(query.limit.value_or(0)));
-  if (query.applicationGlob) {
-    statement.bind(3, std::string_view(*query.applicationGlob));
-  }
 }
 
 }  // namespace
@@ -97,31 +78,26 @@ Status SessionReader::answer(const std::string& sql, const std::function<void(St
 }
 
 Result<std::vector<SessionRow>> SessionReader::sessions(const SessionQuery& query) {
-  std::string sql = kSessionColumns + conditionsOf(query);
-  sql.append(query.neverRan ? "" : std::string(" AND NOT (") + kNeverRan + ")").append(" ORDER BY id DESC");
+  std::string sql = kSessionColumns;
+  sql.append(" WHERE 1");
+  sql.append(query.since ? " AND (ended IS NULL OR ended >= ?1)" : "").append(query.until ? " AND created < ?2" : "");
+  sql.append(query.applicationGlob ? " AND matches_glob(?3, application)" : "");
+  sql.append(query.open ? " AND ended IS NULL" : "").append(" ORDER BY id DESC");
   sql.append(query.limit ? " LIMIT ?4" : "");
   Result<std::vector<SessionRow>> found;
+  const std::string glob = query.applicationGlob.value_or("");
   found.error = answer(
-      sql, [&](Statement& statement) { bindTo(query, statement); },
+      sql,
+      [&](Statement& statement) {
+        statement.bind(1, query.since.value_or(0)).bind(2, query.until.value_or(0)).bind(3, std::string_view(glob));
+        statement.bind(4, static_cast<std::int64_t>(query.limit.value_or(0)));
+      },
       [&](const Statement& row) {
         found.value.push_back(sessionOf(row));
         return true;
       });
   std::reverse(found.value.begin(), found.value.end());
   return found;
-}
-
-Result<std::int64_t> SessionReader::countLeftOut(const SessionQuery& query) {
-  Result<std::int64_t> count;
-  if (query.neverRan) return count;
-  count.error = answer(
-      "SELECT count(*) FROM sessions AS s" + conditionsOf(query) + " AND " + kNeverRan,
-      [&](Statement& statement) { bindTo(query, statement); },
-      [&](const Statement& row) {
-        count.value = row.integer(0);
-        return false;
-      });
-  return count;
 }
 
 Result<std::optional<SessionRow>> SessionReader::session(std::int64_t id) {

@@ -84,9 +84,7 @@ struct SessionQuery {
   std::optional<double> until;
   std::optional<std::string> applicationGlob;  // see globMatches
   bool open = false;                           // only those that haven't ended
-  // Also those that got another type before they ever ran: each has one in its place that did what it was made for.
-  bool neverRan = false;
-  std::optional<std::size_t> limit;  // the newest so many
+  std::optional<std::size_t> limit;            // the newest so many
 };
 
 class SessionReader {
@@ -104,8 +102,6 @@ class SessionReader {
 
   // By ascending id. Here and below the error names the file; nothing but open() comes before.
   Result<std::vector<SessionRow>> sessions(const SessionQuery& query = {});
-  // How many the query leaves out because they got another type before they ever ran.
-  Result<std::int64_t> countLeftOut(const SessionQuery& query);
   // Nothing without an error when there is no such session, or run.
   Result<std::optional<SessionRow>> session(std::int64_t id);
   Result<std::optional<RunRow>> run(std::int64_t id);

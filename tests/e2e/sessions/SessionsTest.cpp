@@ -125,8 +125,12 @@ class SessionsCommand : public ServiceFixture {
     play(script);
     ASSERT_EQ(stopService(SIGTERM), 0);
   }
-  // Those that are listed: a session that gets its type before it starts takes the place of one without a type.
-  std::vector<json> sessions() { return jsonLines(ctl({"sessions", "--json"}).output); }
+  // Those that ran: a session that gets its type before it starts takes the place of one without a type.
+  std::vector<json> sessions() {
+    std::vector<json> all = jsonLines(ctl({"sessions", "--json"}).output);
+    std::erase_if(all, [](const json& session) { return session.at("end_reason") == "retyped"; });
+    return all;
+  }
   // What was derived: the segments but for when they were told, and of the session's own summary what its messages say.
   // With `counts` how many there were too, and how many of them repeated others.
   std::vector<std::string> derived(bool counts = false) {

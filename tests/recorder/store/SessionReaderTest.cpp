@@ -97,29 +97,6 @@ TEST_F(SessionReaderTest, ASpanHasTheSessionsThatWereThereInIt) {
   EXPECT_EQ(found(query), (Ids{2, 3}));
 }
 
-TEST_F(SessionReaderTest, ThoseThatGotAnotherTypeBeforeTheyRanAreCountedAndNotListed) {
-  for (std::int64_t id = 1; id <= 4; ++id) {
-    Session made = session(id, 1000 + static_cast<double>(id), 2000);
-    made.endReason = id == 4 ? "destroyed" : "retyped";
-    addSession(made);
-  }
-  addPeriod(2, 1002, 1003);
-  SessionQuery query;
-  EXPECT_EQ(found(query), (Ids{2, 4})) << "one that ran, and one that ended otherwise";
-  query.limit = 2;
-  EXPECT_EQ(found(query), (Ids{2, 4})) << "the limit is of those that are listed";
-  SessionReader reader(file());
-  ASSERT_TRUE(reader.open().ok());
-  EXPECT_EQ(reader.countLeftOut(query).value, 2);
-  query.until = 1003;
-  EXPECT_EQ(reader.countLeftOut(query).value, 1);
-  EXPECT_TRUE(reader.session(1).value.has_value()) << "by its number each is found";
-  query = {};
-  query.neverRan = true;
-  EXPECT_EQ(found(query), (Ids{1, 2, 3, 4}));
-  EXPECT_EQ(reader.countLeftOut(query).value, 0);
-}
-
 TEST_F(SessionReaderTest, ApplicationOpenAndLimitNarrowTheList) {
   Session other = session(2);
   other.application = "org.example.film";
