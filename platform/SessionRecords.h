@@ -8,6 +8,8 @@
 #include <string>
 #include <string_view>
 
+#include "plist/Dictionary.h"
+
 namespace tarn::platform {
 
 // Serial number of a session in this run, from 1; 0 for nobody's. A reporter ID is its client's choice and may be used
@@ -67,6 +69,9 @@ class SessionRecords {
   virtual void described(SessionNumber session, const SessionFacts& facts) = 0;
   // A period begins. One that was stopped goes on: it has no end any more.
   virtual void started(SessionNumber session) = 0;
+  // A message of the period said what the session's newest of its kind had said, so no back-end got it. As the intake
+  // left it, with its own stamp.
+  virtual void repeated(SessionNumber session, const plist::Dictionary& message) = 0;
   // The period is over, in which so many messages came, those among them that repeated an earlier one counted again.
   // The session has ended so, unless it starts again or another end is told.
   virtual void stopped(SessionNumber session, std::uint64_t messages, std::uint64_t redundant) = 0;

@@ -24,6 +24,8 @@ constexpr std::chrono::milliseconds kExpireTime{25};
 constexpr std::size_t kRowBytes = 32;
 // Between two looks at the clock.
 constexpr std::size_t kEventsBetweenLooks = 64;
+// To whom every message goes.
+constexpr std::string_view kMessages = "tally";
 // Something that goes wrong again right after it was put right waits for the next try.
 constexpr int kTriesAtOnce = 5;
 
@@ -173,9 +175,14 @@ Status EventWriter::carryOver() {
   const std::string lost = carrying_->lost().empty() ? "none is known to be lost"
                                                      : std::to_string(countOf(carrying_->lost())) + " are lost (" +
                                                            textOf(carrying_->lost()) + ")";
-  if (carrying_->carried() > 0 || !carrying_->lost().empty()) {
+  const std::int64_t rows = carrying_->leftBehind();
+  if (carrying_->carried() > 0 || !carrying_->lost().empty() || rows > 0) {
     log_.notice("recorder file " + file_.path().string() + " got " + std::to_string(carrying_->carried()) +
-                " events from " + carrying_->from().filename().string() + "; " + lost);
+                " events from " + carrying_->from().filename().string() + "; " + lost +
+                (rows > 0 ? "; " + std::to_string(rows) +
+                                " rows of sessions, their periods or runs were damaged and are"
+                                " left behind"
+                          : std::string()));
   }
   carrying_.reset();
   tidy();
@@ -208,6 +215,7 @@ Result<std::size_t> EventWriter::writeOnce(const EventBatch& batch, std::size_t 
     return {next - from};
   }
   const auto begun = clock_.monotonic();
+  newest_.begin();
   Status error = file_.begin();
   const SteadyClock::time_point start = SteadyClock::now();
   const auto most = static_cast<std::size_t>(transactionBytes(options_));
@@ -227,6 +235,7 @@ Result<std::size_t> EventWriter::writeOnce(const EventBatch& batch, std::size_t 
     error = file_.commit();
   }
   if (error.failed()) return {0, error};
+  newest_.commit();
   pace_.note(next - from, written - begun, clock_.monotonic() - written);
   return {next - from};
 }
@@ -234,14 +243,25 @@ Result<std::size_t> EventWriter::writeOnce(const EventBatch& batch, std::size_t 
 Status EventWriter::append(const EventBatch& batch, const EventBatch::Event& event, std::size_t& bytes) {
   if (event.isNote()) {
     bytes += event.bytes;
-    return file_.append(batch.note(event));
+    return append(batch.note(event));
   }
   const bool repeats = lastPayload_.sharesStorageWith(event.payload);
   const std::string& payload = payloadText(event.payload);
   detailText_.clear();
   plist::appendJson(detailText_, event.detail);
+  if (options_.redundant == Redundant::Mark && event.backend == kMessages) {
+    newest_.note(event.session, file_.nextId(), event.payload);
+  }
   bytes += kRowBytes + (repeats ? 0 : event.nameSize + payload.size() + detailText_.size());
   return file_.append({event.time, event.backend, batch.name(event), payload, detailText_}, repeats, event.session);
+}
+
+Status EventWriter::append(const SessionNote& note) {
+  if (note.what == SessionNote::What::Repeated) return file_.append(note, newest_.find(note.session, note.message));
+  if (note.what == SessionNote::What::Ended) {
+    newest_.end(note.session);
+  }
+  return file_.append(note);
 }
 
 // The two events of a message carry one payload, which becomes text once.

@@ -27,6 +27,7 @@
 #include "platform/Log.h"
 #include "plist/Result.h"
 #include "recorder/CommitPace.h"
+#include "recorder/NewestMessages.h"
 #include "recorder/RecorderLog.h"
 #include "recorder/RecorderOptions.h"
 #include "recorder/store/CarryOver.h"
@@ -98,6 +99,7 @@ class EventWriter {
   [[nodiscard]] Status noteMissing();
   // One event, or one note; the bytes that it takes are added.
   [[nodiscard]] Status append(const EventBatch& batch, const EventBatch::Event& event, std::size_t& bytes);
+  [[nodiscard]] Status append(const SessionNote& note);
   // Goes on with the rows of a file that was set aside, until they are all in this one.
   [[nodiscard]] Status carryOver();
   // Removes what is over its share beside the database, and lets the database have what is left of the cap.
@@ -118,6 +120,7 @@ class EventWriter {
   EventFile file_;
   StateUsage usage_;
   CommitPace pace_;
+  NewestMessages newest_;          // while repeated ones are marked
   plist::Dictionary lastPayload_;  // whose text payloadText_ is
   std::string payloadText_ = "{}";
   // Kept for its room.

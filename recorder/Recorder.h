@@ -85,6 +85,8 @@ class Recorder {
   // any.
   void record(std::string_view backend, std::string_view name, plist::Dictionary payload, plist::Dictionary detail,
               double time);
+  // Whether messages that repeat earlier ones are to be noted. Threads: any.
+  bool marksRedundant() const noexcept { return options_.redundant == Redundant::Mark; }
   // What happened to a session, in order with the events and as safe as they are. After shutdown() it isn't kept.
   // Throws where there is no memory for it, and then it isn't kept. Threads: any.
   void note(SessionNote note);

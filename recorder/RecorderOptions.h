@@ -13,6 +13,12 @@
 
 namespace tarn::recorder {
 
+// What is kept of a message that repeats an earlier one.
+enum class Redundant {
+  Count,  // how many there were in a period
+  Mark,   // that, and a row each with the event of the message that it repeats
+};
+
 struct RecorderOptions {
   // The database; its log, the log's index, the counts and files set aside lie beside it under names that begin with
   // its own.
@@ -31,6 +37,8 @@ struct RecorderOptions {
   // How often an idle recorder looks for events that have grown too old. Ages are days, so a minute is soon enough; a
   // busy one looks with each commit.
   std::chrono::milliseconds maintenanceInterval{60'000};
+
+  Redundant redundant = Redundant::Count;
 
   // Commits: a group is written this long after its first event at the latest, earlier when nothing new has come for
   // the quiet time or when the group is large. While many come (the last group had busyGroupEvents), company is worth

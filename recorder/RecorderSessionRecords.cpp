@@ -31,9 +31,18 @@ void RecorderSessionRecords::described(platform::SessionNumber session, const pl
 
 void RecorderSessionRecords::started(platform::SessionNumber session) {
   SessionNote note = noteOf(What::Started, session);
-  note.period = periods_ + 1;
+  note.number = periods_ + 1;
   recorder_.note(std::move(note));
   ++periods_;
+}
+
+void RecorderSessionRecords::repeated(platform::SessionNumber session, const plist::Dictionary& message) {
+  if (!recorder_.marksRedundant()) return;
+  SessionNote note = noteOf(What::Repeated, session);
+  note.number = repeats_ + 1;
+  note.message = message;
+  recorder_.note(std::move(note));
+  ++repeats_;
 }
 
 void RecorderSessionRecords::stopped(platform::SessionNumber session, std::uint64_t messages, std::uint64_t redundant) {

@@ -26,6 +26,7 @@ class RecorderSessionRecords final : public platform::SessionRecords {
   platform::SessionNumber created(const platform::SessionFacts& facts) override;
   void described(platform::SessionNumber session, const platform::SessionFacts& facts) override;
   void started(platform::SessionNumber session) override;
+  void repeated(platform::SessionNumber session, const plist::Dictionary& message) override;
   void stopped(platform::SessionNumber session, std::uint64_t messages, std::uint64_t redundant) override;
   void ended(platform::SessionNumber session, platform::SessionEnd end) override;
   platform::SessionNumber enter(platform::SessionNumber session) noexcept override { return enter_(session); }
@@ -39,6 +40,7 @@ class RecorderSessionRecords final : public platform::SessionRecords {
   // Numbers given so far.
   platform::SessionNumber sessions_ = 0;
   std::int64_t periods_ = 0;
+  std::int64_t repeats_ = 0;
 };
 
 }  // namespace tarn::recorder

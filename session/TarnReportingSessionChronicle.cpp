@@ -36,6 +36,15 @@ void TarnReportingSessionChronicle::start() {
   redundant_ = 0;
 }
 
+// Of what comes between a stop and a start nothing else is kept either.
+void TarnReportingSessionChronicle::countRepeated(const plist::Dictionary& message) {
+  if (state_ == State::Running) {
+    records_->repeated(number_, message);
+  }
+  ++messages_;
+  ++redundant_;
+}
+
 void TarnReportingSessionChronicle::stop() noexcept {
   if (state_ != State::Running) return;
   state_ = State::Stopped;

@@ -47,10 +47,9 @@ class TarnReportingSessionChronicle {
   // A period begins, unless one has begun: a start that failed may be tried again.
   void start();
   // The session took a message in.
-  void count(bool isRedundant) noexcept {
-    ++messages_;
-    redundant_ += isRedundant ? 1 : 0;
-  }
+  void count() noexcept { ++messages_; }
+  // The same, of one that repeats an earlier one.
+  void countRepeated(const plist::Dictionary& message);
   // The period is over.
   void stop() noexcept;
   // The session is over, and with it a period that runs.

@@ -54,7 +54,7 @@ std::size_t TarnReportingSession::sendMessage(const MessagePointer& message, pla
   TarnReportingFacilities().tracePoints.emit(kTraceMessage, reporterID_);
   message->setIsSessionStarted(started_);
   message->setIsRedundant(messageIsRedundant(*message));
-  chronicle_.count(message->isRedundant());
+  message->isRedundant() ? chronicle_.countRepeated(message->message()) : chronicle_.count();
   kLog(
       LogLevel::Debug, "TarnReportingSessionWorker action=sendMessage reporterID=%lli app=%@ redundant=%@ message=%@",
       reporterID_, [&] { return TarnReportingUtilityRetrieveAppName(configuration_); },

@@ -48,6 +48,18 @@ Status take(const toml::node& node, std::optional<platform::SnareReason>& reason
   return {};
 }
 
+Status take(const toml::node& node, recorder::Redundant& redundant) {
+  const auto word = node.value_exact<std::string>();
+  if (word == "count") {
+    redundant = recorder::Redundant::Count;
+  } else if (word == "mark") {
+    redundant = recorder::Redundant::Mark;
+  } else {
+    return wrong("must be \"count\" or \"mark\"");
+  }
+  return {};
+}
+
 Status takePath(const toml::node& node, const char* what, std::optional<std::string>& path) {
   path = node.value_exact<std::string>();
   return path && !path->empty() ? Status() : wrong(std::string("must be ") + what + "'s path");
@@ -115,7 +127,7 @@ struct Setting {
 
 using Node = const toml::node&;
 using Host = HostConfiguration&;
-constexpr std::array<Setting, 28> kSettings{{
+constexpr std::array<Setting, 29> kSettings{{
     {"tally", "in_use", [](Node node, Host host) { return take(node, host.tally.inUse); }},
     {"rtc", "backends", [](Node node, Host host) { return take(node, host.rtc.backends); }},
     {"rtc", "no_backends", [](Node node, Host host) { return take(node, host.rtc.noBackends); }},
@@ -134,6 +146,7 @@ constexpr std::array<Setting, 28> kSettings{{
      [](Node node, Host host) { return takeWithin<1, 36500>(node, host.recorder.maxAgeDays); }},
     {"recorder", "summary_max_age_days",
      [](Node node, Host host) { return takeWithin<1, 36500>(node, host.recorder.summaryMaxAgeDays); }},
+    {"recorder", "redundant", [](Node node, Host host) { return take(node, host.recorder.redundant); }},
     {"limits", "max_frame_bytes",
      [](Node node, Host host) { return takeWithin<64, 67108864>(node, host.limits.maxFrameBytes); }},
     {"limits", "half_frame_ms",

@@ -169,7 +169,7 @@ Status CarryOver::finish(EventFile& into) {
   wanted_ = 0;
   into.skipTo(last_);
   if (auto error = into.begin(); error.failed()) return error;
-  Status error = into.carrySessions(connection_);
+  Status error = into.carrySessions(connection_, leftBehind_);
   for (std::size_t i = 0; error.ok() && i < lost_.size(); ++i) {
     error = into.noteLoss(lost_[i]);
   }

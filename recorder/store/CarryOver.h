@@ -43,6 +43,8 @@ class CarryOver {
   std::int64_t carried() const noexcept { return carried_; }
   // Ids that the old file should have held, as far as that is known; complete after goOn().
   const std::vector<IdRange>& lost() const noexcept { return lost_; }
+  // Rows of sessions and the like that weren't as they were written; complete after goOn().
+  std::int64_t leftBehind() const noexcept { return leftBehind_; }
 
  private:
   // A row between the two files.
@@ -98,6 +100,7 @@ class CarryOver {
   std::int64_t wanted_ = 0;  // the id that should come next; 0 when nothing tells
   std::int64_t first_ = 0;   // carried, 0 for none
   std::int64_t carried_ = 0;
+  std::int64_t leftBehind_ = 0;
 };
 
 }  // namespace tarn::recorder

@@ -38,7 +38,7 @@ std::size_t EventBatch::add(std::string_view backend, std::string_view name, pli
 
 std::size_t EventBatch::add(SessionNote note) {
   const std::size_t bytes = sizeof(Event) + sizeof(SessionNote) + note.facts.process.size() +
-                            note.facts.application.size() + note.facts.serviceName.size();
+                            note.facts.application.size() + note.facts.serviceName.size() + note.message.storageBytes();
   notes_.push_back(std::move(note));
   try {
     events_.push_back(Event{{}, 0, 0, 0, bytes, {}, {}, 0, notes_.size() - 1});

@@ -149,6 +149,7 @@ void EventFile::finalizeStatements() noexcept {
   table_.finalize();
   sessions_.finalize();
   check_.finalize();
+  sessionCheck_.finalize();
   retention_.finalize();
 }
 
@@ -253,6 +254,10 @@ Status EventFile::append(const SessionNote& note) {
   return rollbackAfter(sessions_.write(note, time_.seconds()));
 }
 
+Status EventFile::append(const SessionNote& repeat, std::int64_t repeated) {
+  return rollbackAfter(sessions_.repeat(repeat, repeated, nextId_ - 1));
+}
+
 Status EventFile::append(const StoredEvent& event, bool repeatsPayload, platform::SessionNumber owner) {
   StoredEvent owned = event;
   owned.session = sessions_.rowOf(owner);
@@ -330,15 +335,7 @@ Status EventFile::commit() {
 }
 
 Status EventFile::verify(std::chrono::steady_clock::time_point deadline) {
-  Status error = check_.isDone() ? check_.begin() : Status();
-  error = error.ok() ? check_.goOn(deadline) : error;
-  if (error.ok() && !check_.lost().empty()) {
-    error = Error{SQLITE_CORRUPT, "damaged: events " + textOf(check_.lost()) + " aren't as they were written"};
-  }
-  if (error.failed()) {
-    check_.finalize();
-  }
-  return error;
+  return verifySome(check_, sessionCheck_, deadline);
 }
 
 Status EventFile::checkpointIfDue() {

@@ -31,6 +31,7 @@
 #include "recorder/store/EventTable.h"
 #include "recorder/store/RecorderTime.h"
 #include "recorder/store/Retention.h"
+#include "recorder/store/SessionCheck.h"
 #include "recorder/store/SessionTable.h"
 #include "recorder/store/Statement.h"
 #include "recorder/store/StoreCheck.h"
@@ -76,6 +77,8 @@ class EventFile {
   [[nodiscard]] Status endRun(double time);
   // What happened to a session, after the events appended so far; in a transaction.
   [[nodiscard]] Status append(const SessionNote& note);
+  // The same of a message that repeats the one of an event, 0 where that isn't known.
+  [[nodiscard]] Status append(const SessionNote& repeat, std::int64_t repeated);
   // Adds an event under the next id, in a transaction. Texts are looked at during the call only; a time that isn't a
   // number is stored as 0. `repeatsPayload`: its payload is that of the append before. The session is that of `owner`.
   [[nodiscard]] Status append(const StoredEvent& event, bool repeatsPayload, platform::SessionNumber owner);
@@ -89,9 +92,9 @@ class EventFile {
   // What was carried begins with this id, and whoever reads along goes on after the last one. In a transaction, after
   // the last carry().
   [[nodiscard]] Status noteCarried(std::int64_t first);
-  // Takes over the rows of runs, sessions and periods that another file has, as far as they can be read. In a
-  // transaction, after the last carry().
-  [[nodiscard]] Status carrySessions(Connection& from);
+  // Takes over the rows of runs, sessions, periods and repeated messages that another file has, as far as they can be
+  // read and are as they were written; the others are counted. In a transaction, after the last carry().
+  [[nodiscard]] Status carrySessions(Connection& from, std::int64_t& leftBehind);
   // Removes what retention doesn't keep, until `deadline` at the latest; in a transaction, after its appends.
   [[nodiscard]] Status expire(std::chrono::steady_clock::time_point deadline);
   // Ends the transaction and synchronises it: what was appended is safe when this succeeds.
@@ -106,6 +109,8 @@ class EventFile {
   double seconds() const noexcept { return time_.seconds(); }
   // The id of the last committed event, in this file or in those before it.
   std::int64_t lastId() const noexcept { return lastId_; }
+  // That of the next append(), in a transaction.
+  std::int64_t nextId() const noexcept { return nextId_; }
   // Never two events with one id: the ids of a file that was set aside count too. Only forward.
   void skipTo(std::int64_t lastId) noexcept { lastId_ = std::max(lastId_, lastId); }
   // Ids that were committed and weren't in the file when it was opened: its log was cut or taken away. Told once.
@@ -122,7 +127,7 @@ class EventFile {
   // damage as an error. A reading error too; then the check starts again.
   [[nodiscard]] Status verify(std::chrono::steady_clock::time_point deadline);
   // Whether the check came to the file's end, or none has begun.
-  bool isVerified() const noexcept { return check_.isDone(); }
+  bool isVerified() const noexcept { return check_.isDone() && sessionCheck_.isDone(); }
 
   // Whether retention has more to remove than the last expire() got to. Another one is due soon then.
   bool hasMoreToExpire() const noexcept { return retention_.hasMore(); }
@@ -173,6 +178,7 @@ class EventFile {
   SessionTable sessions_;
   Retention retention_;
   StoreCheck check_{connection_};
+  SessionCheck sessionCheck_{connection_};  // after that
   RecorderTime time_;
   EventGroup group_;          // of the events since the last one that was full
   std::string groupHashes_;   // while it is written

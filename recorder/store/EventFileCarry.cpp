@@ -17,8 +17,8 @@ Status EventFile::carry(std::int64_t id, double seconds, const StoredEvent& even
   return insertAs(id, event, repeatsPayload, true);
 }
 
-Status EventFile::carrySessions(Connection& from) {
-  return rollbackAfter(SessionTable::carry(from, connection_));
+Status EventFile::carrySessions(Connection& from, std::int64_t& leftBehind) {
+  return rollbackAfter(SessionTable::carry(from, connection_, leftBehind));
 }
 
 Status EventFile::noteLoss(const IdRange& lost) {

@@ -7,6 +7,8 @@
 #include <string>
 #include <utility>
 
+#include "recorder/store/SessionSums.h"
+
 namespace tarn::recorder {
 
 namespace {
@@ -16,6 +18,7 @@ using SteadyClock = std::chrono::steady_clock;
 // Events in one step, groups that one looks at, and pages given back in one go: a few milliseconds each.
 constexpr std::int64_t kSliceEvents = 512;
 constexpr int kSliceGroups = 512;
+constexpr std::int64_t kSliceRepeats = 1024;
 constexpr std::int64_t kPagesAtOnce = 64;
 // For space so many bytes at least go in one step, as each has to look around.
 constexpr std::int64_t kLeastSliceBytes = std::int64_t{1} << 15;
@@ -52,8 +55,18 @@ int Retention::prepare(Connection& connection) {
   connection_ = &connection;
   const struct {
     Statement& statement;
-    const char* sql;
+    std::string sql;
   } all[] = {
+      {oldest_, "SELECT id FROM event_rows ORDER BY id LIMIT 1"},
+      {oldestRepeat_, "SELECT after_event FROM redundant_messages ORDER BY id LIMIT 1"},
+      {keepLastRepeat_, "INSERT OR REPLACE INTO recorder_state SELECT 'last_repeat', max(id) FROM redundant_messages"},
+      {removeRepeatSums_,
+       SessionSums::removeOf(SessionSums::Redundant,
+                             "SELECT id FROM (SELECT id, after_event FROM redundant_messages ORDER BY id LIMIT ?2) "
+                             "WHERE after_event < ?1")},
+      {removeRepeats_,
+       "DELETE FROM redundant_messages WHERE id IN (SELECT id FROM redundant_messages ORDER BY id LIMIT ?2) AND "
+       "after_event < ?1"},
       {pageCount_, "PRAGMA page_count"},
       {freePages_, "PRAGMA freelist_count"},
       {groupTimes_,
@@ -72,7 +85,8 @@ int Retention::prepare(Connection& connection) {
 }
 
 void Retention::finalize() noexcept {
-  for (Statement* const statement : {&pageCount_, &freePages_, &groupTimes_}) {
+  for (Statement* const statement : {&oldest_, &oldestRepeat_, &keepLastRepeat_, &removeRepeatSums_, &removeRepeats_,
+                                     &pageCount_, &freePages_, &groupTimes_}) {
     statement->finalize();
   }
   scan_.finalize();
@@ -117,6 +131,28 @@ std::map<Owner, std::uint64_t> Retention::expiredByOwner() const {
     }
   }
   return expired;
+}
+
+int Retention::readOldest(std::int64_t& id) {
+  const int code = oldest_.step();
+  if (code == SQLITE_ROW) {
+    id = oldest_.integer(0);
+  }
+  oldest_.reset();
+  return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
+}
+
+// They are in the order of the events that they came after, so a look at the first one tells whether there are any.
+int Retention::removeRepeats(std::int64_t before, bool& removedAny) {
+  int code = oldestRepeat_.step();
+  removedAny = code == SQLITE_ROW && oldestRepeat_.integer(0) < before;
+  oldestRepeat_.reset();
+  if (!removedAny) return code == SQLITE_ROW || code == SQLITE_DONE ? SQLITE_OK : code;
+  code = keepLastRepeat_.run();
+  for (Statement* const statement : {&removeRepeatSums_, &removeRepeats_}) {
+    code = code == SQLITE_OK ? statement->bind(1, before).bind(2, kSliceRepeats).run() : code;
+  }
+  return code;
 }
 
 int Retention::addToShares(std::int64_t id, const StoredEvent& event) {
@@ -292,8 +328,14 @@ int Retention::removeSlice(double now, std::int64_t newest, Deadline deadline, b
 
   std::int64_t fileBytes = 0;
   std::int64_t usedBytes = 0;
+  std::int64_t oldest = newest + 1;
   code = readSizes(fileBytes, usedBytes);
+  code = code == SQLITE_OK ? readOldest(oldest) : code;
   const std::int64_t excess = usedBytes - (limits_.maxBytes - limits_.maxBytes / kReserveShare);
+  if (code == SQLITE_OK) {
+    code = removeRepeats(excess > 0 ? newest + 1 : std::max(oldest, agedFrom_[indexOf(EventSort::Message)]), more);
+  }
+  if (code != SQLITE_OK || more) return code;
   const bool isNear = usedBytes / kCountingFrom >= limits_.maxBytes / kOfQuarters;
   if (code == SQLITE_OK && count_ != Count::Done && (isNear || excess > 0)) {
     code = goOnCounting(newest, excess > 0 ? Deadline::max() : deadline);

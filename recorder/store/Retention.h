@@ -9,6 +9,9 @@
 // the limit on: all rows are gone through once, in pieces, and what comes and goes after that is added up. Nothing of
 // it is kept in the file.
 //
+// The rows of repeated messages say least: for space all of them go before an event does, the oldest first, else as
+// those of messages do.
+//
 // Too old: messages and summaries each have an age. An event's is that of its group, on the recorder's own time and not
 // by the event's; what was recorded before there were groups is as old as the first group.
 //
@@ -102,6 +105,10 @@ class Retention {
   // Removes what was picked.
   [[nodiscard]] int removePicked(std::uint64_t& removed);
   void notePicked(const ScannedEvent& event);
+  // The lowest id; `id` stays in an empty file.
+  [[nodiscard]] int readOldest(std::int64_t& id);
+  // Rows of repeated messages that came before this event, the oldest first, so many as one step takes.
+  [[nodiscard]] int removeRepeats(std::int64_t before, bool& removedAny);
   [[nodiscard]] int readPragma(Statement& pragma, std::int64_t& value);
   // Of the file, and of its pages in use.
   [[nodiscard]] int readSizes(std::int64_t& fileBytes, std::int64_t& usedBytes);
@@ -112,6 +119,11 @@ class Retention {
   // Between prepare() and finalize().
   Connection* connection_ = nullptr;
   // Prepared once for each connection, as they run with every commit.
+  Statement oldest_;
+  Statement oldestRepeat_;
+  Statement keepLastRepeat_;
+  Statement removeRepeatSums_;
+  Statement removeRepeats_;
   Statement pageCount_;
   Statement freePages_;
   Statement groupTimes_;

@@ -38,7 +38,8 @@ constexpr const char* kGreatest =
     "SELECT max(coalesce((SELECT max(id) FROM runs), 0), coalesce((SELECT value FROM recorder_state WHERE name = "
     "'last_run'), 0)), max(coalesce((SELECT max(id) FROM sessions), 0), coalesce((SELECT value FROM recorder_state "
     "WHERE name = 'last_session'), 0)), max(coalesce((SELECT max(id) FROM periods), 0), coalesce((SELECT value FROM "
-    "recorder_state WHERE name = 'last_period'), 0))";
+    "recorder_state WHERE name = 'last_period'), 0)), max(coalesce((SELECT max(id) FROM redundant_messages), 0), "
+    "coalesce((SELECT value FROM recorder_state WHERE name = 'last_repeat'), 0))";
 
 // Sessions that nobody closed, with their last event, and the last moment that is known of each.
 std::string makeOpen(std::int64_t run) {
@@ -50,15 +51,19 @@ std::string makeOpen(std::int64_t run) {
          std::to_string(run) + ") AS o;";
 }
 
-constexpr const char* kCloseOpen =
+constexpr const char* kCloseSession =
     "UPDATE sessions SET end_reason = 'killed', ended = coalesce("
     "(SELECT r.time FROM open_sessions AS o JOIN event_rows AS r ON r.id = o.last WHERE o.id = sessions.id), "
-    "(SELECT max(started) FROM periods WHERE session = sessions.id), created) "
-    "WHERE id IN (SELECT id FROM open_sessions);"
+    "(SELECT max(started) FROM periods WHERE session = sessions.id), created) WHERE id = ?1";
+constexpr const char* kOpenPeriods =
+    "SELECT id FROM periods WHERE stopped IS NULL AND session IN (SELECT id FROM open_sessions)";
+constexpr const char* kClosePeriod =
     "UPDATE periods SET stopped = (SELECT ended FROM sessions WHERE id = periods.session), last_event = CASE WHEN "
-    "first_event IS NOT NULL THEN (SELECT last FROM open_sessions WHERE id = periods.session) END "
-    "WHERE stopped IS NULL AND session IN (SELECT id FROM open_sessions);"
-    "DROP TABLE open_sessions;";
+    "first_event IS NOT NULL THEN (SELECT last FROM open_sessions WHERE id = periods.session) END WHERE id = ?1";
+constexpr const char* kCloseRun =
+    "UPDATE runs SET end_reason = 'killed', ended = max(started, coalesce((SELECT time FROM event_rows ORDER BY id "
+    "DESC "
+    "LIMIT 1), started)) WHERE id = ?1";
 
 }  // namespace
 
@@ -68,20 +73,26 @@ int SessionTable::prepare(Connection& connection) {
     Statement& statement;
     const char* sql;
   } all[] = {
-      {describe_, kDescribe}, {start_, kStart},   {setFirst_, "UPDATE periods SET first_event = ?2 WHERE id = ?1"},
-      {stop_, kStop},         {setEnd_, kSetEnd}, {noteAge_, "INSERT OR REPLACE INTO session_ages VALUES(?1, ?2)"},
+      {describe_, kDescribe},
+      {start_, kStart},
+      {setFirst_, "UPDATE periods SET first_event = ?2 WHERE id = ?1"},
+      {stop_, kStop},
+      {setEnd_, kSetEnd},
+      {noteAge_, "INSERT OR REPLACE INTO session_ages VALUES(?1, ?2)"},
+      {repeat_, "INSERT OR IGNORE INTO redundant_messages VALUES(?1, ?2, ?3, ?4, ?5, ?6, ?7)"},
   };
   for (const auto& [statement, sql] : all) {
     if (const int code = statement.prepare(connection.handle(), sql, true); code != SQLITE_OK) return code;
   }
   agedAt_ = -1;
-  return SQLITE_OK;
+  return sums_.prepare(connection);
 }
 
 void SessionTable::finalize() noexcept {
-  for (Statement* const statement : {&describe_, &start_, &setFirst_, &stop_, &setEnd_, &noteAge_}) {
+  for (Statement* const statement : {&describe_, &start_, &setFirst_, &stop_, &setEnd_, &noteAge_, &repeat_}) {
     statement->finalize();
   }
+  sums_.finalize();
   rolledBack();
 }
 
@@ -92,11 +103,8 @@ int SessionTable::beginRun(const RunFacts& run) {
   code = add.prepare(connection_->handle(),
                      "INSERT OR IGNORE INTO runs VALUES(?1, nullif(?2, ''), nullif(?3, ''), ?4, NULL, NULL)");
   if (code == SQLITE_OK) {
-    code = add.bind(1, *run_)
-               .bind(2, std::string_view(run.boot))
-               .bind(3, std::string_view(run.version))
-               .bind(4, run.started)
-               .run();
+    add.bind(1, *run_).bind(2, std::string_view(run.boot)).bind(3, std::string_view(run.version)).bind(4, run.started);
+    code = sums_.change(SessionSums::Runs, *run_, add);
   }
   return code == SQLITE_OK ? closeOlder() : code;
 }
@@ -111,17 +119,39 @@ int SessionTable::findIds() {
   run_ = greatest.integer(0) + 1;
   sessions_ = greatest.integer(1);
   periodsBefore_ = greatest.integer(2);
+  repeatsBefore_ = greatest.integer(3);
   return SQLITE_OK;
 }
 
 int SessionTable::closeOlder() {
-  int code = connection_->run((makeOpen(*run_) + kCloseOpen).c_str());
+  int code = connection_->run(makeOpen(*run_).c_str());
+  code = code == SQLITE_OK ? changeEach(SessionSums::Sessions, "SELECT id FROM open_sessions", kCloseSession) : code;
+  code = code == SQLITE_OK ? changeEach(SessionSums::Periods, kOpenPeriods, kClosePeriod) : code;
   if (code == SQLITE_OK) {
-    code =
-        connection_->run(("UPDATE runs SET end_reason = 'killed', ended = max(started, coalesce((SELECT time FROM "
-                          "event_rows ORDER BY id DESC LIMIT 1), started)) WHERE ended IS NULL AND id <> " +
-                          std::to_string(*run_) + "; DELETE FROM runs WHERE id <= " + std::to_string(*run_ - kMostRuns))
-                             .c_str());
+    const std::string others = "SELECT id FROM runs WHERE ended IS NULL AND id <> " + std::to_string(*run_);
+    code = changeEach(SessionSums::Runs, others, kCloseRun);
+  }
+  if (code != SQLITE_OK) return code;
+  const std::string old = "FROM runs WHERE id <= " + std::to_string(*run_ - kMostRuns) + ";";
+  return connection_->run(("DROP TABLE open_sessions;" +
+                           SessionSums::removeOf(SessionSums::Runs, "SELECT id " + old.substr(0, old.size() - 1)) +
+                           "DELETE " + old)
+                              .c_str());
+}
+
+int SessionTable::changeEach(SessionSums::Place place, const std::string& ids, const char* change) {
+  Statement statement;
+  int code = statement.prepare(connection_->handle(), ids);
+  std::vector<std::int64_t> all;
+  if (code == SQLITE_OK) {
+    for (code = statement.step(); code == SQLITE_ROW; code = statement.step()) {
+      all.push_back(statement.integer(0));
+    }
+  }
+  if (code != SQLITE_DONE) return code;
+  code = statement.prepare(connection_->handle(), change);
+  for (std::size_t i = 0; code == SQLITE_OK && i < all.size(); ++i) {
+    code = sums_.change(place, all[i], statement.bind(1, all[i]));
   }
   return code;
 }
@@ -131,37 +161,64 @@ int SessionTable::endRun(double time) {
   Statement end;
   const int code =
       end.prepare(connection_->handle(), "UPDATE runs SET ended = ?2, end_reason = 'stopped' WHERE id = ?1");
-  return code == SQLITE_OK ? end.bind(1, *run_).bind(2, time).run() : code;
+  return code == SQLITE_OK ? sums_.change(SessionSums::Runs, *run_, end.bind(1, *run_).bind(2, time)) : code;
 }
 
-// Rows after one that can't be read are looked for from the end.
-int SessionTable::carry(Connection& from, Connection& into) {
-  constexpr const char* kCarried[] = {"runs", "sessions", "periods", "session_ages"};
-  if (!from.isOpen()) return SQLITE_OK;
-  for (const char* const table : kCarried) {
-    for (const char* const order : {"", " ORDER BY 1 DESC"}) {
-      Statement read;
-      if (read.prepare(from.handle(), std::string("SELECT * FROM ") + table + order) != SQLITE_OK) break;
-      const int columns = sqlite3_column_count(read.handle());
-      std::string places = "?1";
-      for (int column = 1; column < columns; ++column) {
-        places += ", ?" + std::to_string(column + 1);
-      }
-      Statement write;
-      int code =
-          write.prepare(into.handle(), std::string("INSERT OR IGNORE INTO ") + table + " VALUES(" + places + ")");
-      if (code != SQLITE_OK) return code;
-      int found = read.step();
-      for (; found == SQLITE_ROW; found = read.step()) {
-        for (int column = 0; column < columns; ++column) {
-          sqlite3_bind_value(write.handle(), column + 1, sqlite3_column_value(read.handle(), column));
-        }
-        if (code = write.run(); code != SQLITE_OK) return code;
-      }
-      if (found == SQLITE_DONE) break;
+namespace {
+
+// The columns of a table of another file, and whether a row of it isn't as its checksum says.
+std::string readingOf(Connection& from, std::size_t place) {
+  const SessionSums::Table& table = SessionSums::kTables.at(place);
+  const bool hasSums = from.integer("SELECT count(*) FROM sqlite_schema WHERE name = 'row_hashes'") == 1;
+  const std::string isDamaged = hasSums ? SessionSums::hashOfRow(place) +
+                                              " <> (SELECT hash FROM row_hashes WHERE row_hashes.id = 4 * t.id + " +
+                                              std::to_string(place) + ")"
+                                        : std::string("0");
+  return "SELECT " + isDamaged + ", " + std::string(table.columns) + " FROM " + std::string(table.name) + " AS t";
+}
+
+}  // namespace
+
+// Rows after one that can't be read are looked for from the end. What nothing proves is taken.
+int SessionTable::carryTable(Connection& from, Connection& into, const std::string& reading, const std::string& table,
+                             std::int64_t& leftBehind) {
+  for (const char* const order : {"", " ORDER BY 2 DESC"}) {
+    Statement read;
+    if (read.prepare(from.handle(), reading + order) != SQLITE_OK) break;
+    const int columns = sqlite3_column_count(read.handle()) - 1;
+    std::string places = "?1";
+    for (int column = 1; column < columns; ++column) {
+      places += ", ?" + std::to_string(column + 1);
     }
+    Statement write;
+    int code = write.prepare(into.handle(), "INSERT OR IGNORE INTO " + table + " VALUES(" + places + ")");
+    if (code != SQLITE_OK) return code;
+    int found = read.step();
+    for (; found == SQLITE_ROW; found = read.step()) {
+      if (read.integer(0) != 0) {
+        ++leftBehind;
+        continue;
+      }
+      for (int column = 0; column < columns; ++column) {
+        sqlite3_bind_value(write.handle(), column + 1, sqlite3_column_value(read.handle(), column + 1));
+      }
+      if (code = write.run(); code != SQLITE_OK) return code;
+    }
+    if (found == SQLITE_DONE) break;
   }
   return SQLITE_OK;
+}
+
+int SessionTable::carry(Connection& from, Connection& into, std::int64_t& leftBehind) {
+  leftBehind = 0;
+  if (!from.isOpen()) return SQLITE_OK;
+  int code = SessionSums::addFunction(from);
+  for (std::size_t place = 0; code == SQLITE_OK && place < SessionSums::kTables.size(); ++place) {
+    code = carryTable(from, into, readingOf(from, place), std::string(SessionSums::kTables.at(place).name), leftBehind);
+  }
+  std::int64_t none = 0;
+  code = code == SQLITE_OK ? carryTable(from, into, "SELECT 0, * FROM session_ages", "session_ages", none) : code;
+  return code == SQLITE_OK ? into.run(SessionSums::sealAll().c_str()) : code;
 }
 
 int SessionTable::write(const SessionNote& note, double seconds) {
@@ -174,6 +231,8 @@ int SessionTable::write(const SessionNote& note, double seconds) {
       return describe(note);
     case What::Started:
       return start(note);
+    case What::Repeated:
+      return repeat(note, 0, 0);
     case What::Stopped:
       code = closePeriod(note);
       return code == SQLITE_OK ? setEnd(rowOf(note.session), &note, platform::SessionEnd::Stopped) : code;
@@ -186,7 +245,7 @@ int SessionTable::write(const SessionNote& note, double seconds) {
 
 int SessionTable::describe(const SessionNote& note) {
   const platform::SessionFacts& facts = note.facts;
-  return describe_.bind(1, rowOf(note.session))
+  describe_.bind(1, rowOf(note.session))
       .bind(2, *run_)
       .bind(3, facts.reporter)
       .bind(4, facts.connection)
@@ -196,19 +255,30 @@ int SessionTable::describe(const SessionNote& note) {
       .bind(8, std::string_view(facts.application))
       .bind(9, facts.serviceType)
       .bind(10, std::string_view(facts.serviceName))
-      .bind(11, note.time)
-      .run();
+      .bind(11, note.time);
+  return sums_.change(SessionSums::Sessions, rowOf(note.session), describe_);
 }
 
 int SessionTable::start(const SessionNote& note) {
-  const std::int64_t row = periodsBefore_ + note.period;
+  const std::int64_t row = periodsBefore_ + note.number;
   Period& period = periods_[note.session];
   if (period.row != row) {
     period = Period{row};
   }
   forgetLast();
-  int code = start_.bind(1, row).bind(2, rowOf(note.session)).bind(3, note.time).run();
+  start_.bind(1, row).bind(2, rowOf(note.session)).bind(3, note.time);
+  const int code = sums_.change(SessionSums::Periods, row, start_);
   return code == SQLITE_OK ? setEnd(rowOf(note.session), nullptr, {}) : code;
+}
+
+int SessionTable::repeat(const SessionNote& note, std::int64_t event, std::int64_t after) {
+  const auto period = periods_.find(note.session);
+  const plist::ValueView stamp = note.message.get("tarnreporting_timestamp");
+  repeat_.bind(1, repeatsBefore_ + note.number).bind(2, rowOf(note.session)).bind(4, note.time).bind(7, after);
+  period == periods_.end() ? repeat_.bindNull(3) : repeat_.bind(3, period->second.row);
+  stamp.isNumber() || stamp.kind() == plist::Kind::Date ? repeat_.bind(5, stamp.asDouble()) : repeat_.bindNull(5);
+  event == 0 ? repeat_.bindNull(6) : repeat_.bind(6, event);
+  return sums_.change(SessionSums::Redundant, repeatsBefore_ + note.number, repeat_);
 }
 
 int SessionTable::closePeriod(const SessionNote& note) {
@@ -221,13 +291,13 @@ int SessionTable::closePeriod(const SessionNote& note) {
   stop_.bind(1, period.row).bind(2, note.time);
   note.what == What::Stopped ? stop_.bind(3, note.messages).bind(4, note.redundant) : stop_.bindNull(3).bindNull(4);
   period.first == 0 ? stop_.bindNull(5).bindNull(6) : stop_.bind(5, period.first).bind(6, period.last);
-  return stop_.run();
+  return sums_.change(SessionSums::Periods, period.row, stop_);
 }
 
 int SessionTable::setEnd(std::int64_t session, const SessionNote* note, platform::SessionEnd end) {
   setEnd_.bind(1, session).bind(2, *run_);
   note == nullptr ? setEnd_.bindNull(3).bindNull(4) : setEnd_.bind(3, note->time).bind(4, platform::nameOf(end));
-  return setEnd_.run();
+  return sums_.change(SessionSums::Sessions, session, setEnd_);
 }
 
 int SessionTable::addEvent(platform::SessionNumber session, std::int64_t event) {
@@ -241,7 +311,7 @@ int SessionTable::addEvent(platform::SessionNumber session, std::int64_t event) 
   period.first = period.first == 0 ? event : std::min(period.first, event);
   period.last = event;
   if (std::exchange(period.firstIsWritten, true)) return SQLITE_OK;
-  return setFirst_.bind(1, period.row).bind(2, period.first).run();
+  return sums_.change(SessionSums::Periods, period.row, setFirst_.bind(1, period.row).bind(2, period.first));
 }
 
 void SessionTable::forgetLast() noexcept {
@@ -299,15 +369,19 @@ int SessionTable::expire(double seconds, double age, std::int64_t most) {
       connection_->integer("SELECT CASE count(*) WHEN 256 THEN max(id) ELSE 0 END FROM old_sessions").value_or(0);
   expiredAt_ = expiredUpTo_ > 0 ? -1 : seconds;
   return connection_->run(
-      "INSERT OR REPLACE INTO recorder_state SELECT 'last_session', max(id) FROM sessions "
-      "WHERE EXISTS (SELECT 1 FROM old_sessions) HAVING max(id) IS NOT NULL;"
-      "INSERT OR REPLACE INTO recorder_state SELECT 'last_period', max(id) FROM periods "
-      "WHERE EXISTS (SELECT 1 FROM old_sessions) HAVING max(id) IS NOT NULL;"
-      "DELETE FROM periods WHERE session IN (SELECT id FROM old_sessions);"
-      "DELETE FROM sessions WHERE id IN (SELECT id FROM old_sessions);"
-      "DELETE FROM session_ages WHERE first < (SELECT max(first) FROM session_ages WHERE first <= "
-      "(SELECT min(id) FROM sessions));"
-      "DROP TABLE old_sessions");
+      ("INSERT OR REPLACE INTO recorder_state SELECT 'last_session', max(id) FROM sessions "
+       "WHERE EXISTS (SELECT 1 FROM old_sessions) HAVING max(id) IS NOT NULL;"
+       "INSERT OR REPLACE INTO recorder_state SELECT 'last_period', max(id) FROM periods "
+       "WHERE EXISTS (SELECT 1 FROM old_sessions) HAVING max(id) IS NOT NULL;" +
+       SessionSums::removeOf(SessionSums::Periods,
+                             "SELECT id FROM periods WHERE session IN (SELECT id FROM old_sessions)") +
+       SessionSums::removeOf(SessionSums::Sessions, "SELECT id FROM old_sessions") +
+       "DELETE FROM periods WHERE session IN (SELECT id FROM old_sessions);"
+       "DELETE FROM sessions WHERE id IN (SELECT id FROM old_sessions);"
+       "DELETE FROM session_ages WHERE first < (SELECT max(first) FROM session_ages WHERE first <= "
+       "(SELECT min(id) FROM sessions));"
+       "DROP TABLE old_sessions")
+          .c_str());
 }
 
 }  // namespace tarn::recorder

@@ -4,6 +4,7 @@
 //   runs(id, boot, version, started, ended, end_reason)                  one row a run of the service
 //   sessions(id, run, ..., created, ended, end_reason)                   id: what the file gave before + the number
 //   periods(id, session, started, stopped, messages, redundant, first_event, last_event)
+//   redundant_messages(id, session, period, time, stamp, event, after_event)
 //
 // What a note says may be written twice, as after a commit that failed and was in all the same: it says the same then.
 // A row that isn't there, since the file is another one, is made with what the note says. Owner: the event file.
@@ -19,18 +20,20 @@
 
 #include "platform/SessionRecords.h"
 #include "recorder/store/Connection.h"
+#include "recorder/store/SessionSums.h"
 #include "recorder/store/Statement.h"
 
 namespace tarn::recorder {
 
 // Something that happened to a session, as the clients' thread leaves it for the writer.
 struct SessionNote {
-  enum class What { Created, Described, Started, Stopped, Ended };
+  enum class What { Created, Described, Started, Repeated, Stopped, Ended };
   What what = What::Created;
   platform::SessionNumber session = 0;
   double time = 0;               // epoch seconds
   platform::SessionFacts facts;  // Created, Described
-  std::int64_t period = 0;       // Started: its number in this run, from 1
+  std::int64_t number = 0;       // Started, Repeated: of the period or the repeat in this run, from 1
+  plist::Dictionary message;     // Repeated
   std::int64_t messages = 0;     // Stopped
   std::int64_t redundant = 0;    // Stopped
   platform::SessionEnd end{};    // Ended
@@ -61,6 +64,8 @@ class SessionTable {
   [[nodiscard]] int endRun(double time);
   // `seconds` is now, on the recorder's own time. In a transaction, after the events that came before the note.
   [[nodiscard]] int write(const SessionNote& note, double seconds);
+  // A message repeated that of an event (0: it isn't known), and came after another one. In a transaction.
+  [[nodiscard]] int repeat(const SessionNote& note, std::int64_t event, std::int64_t after);
   // The session's row, 0 for nobody's. After beginRun().
   std::int64_t rowOf(platform::SessionNumber session) const noexcept { return session == 0 ? 0 : sessions_ + session; }
   // An event was handed over for it: the first and the last one of a period are kept. In a transaction.
@@ -68,8 +73,9 @@ class SessionTable {
     const bool hasNoPeriod = session == 0 || (session == lastSession_ && lastPeriod_ == nullptr);
     return hasNoPeriod ? 0 /* SQLITE_OK */ : addEvent(session, event);
   }
-  // Copies what can be read of another file's rows. In a transaction of `into`, before beginRun().
-  [[nodiscard]] static int carry(Connection& from, Connection& into);
+  // Copies what can be read of another file's rows, but for those that aren't as their checksums say, which are
+  // counted. In a transaction of `into`, before beginRun().
+  [[nodiscard]] static int carry(Connection& from, Connection& into, std::int64_t& leftBehind);
   // What was written since the last of these two is safe, or isn't there.
   void committed() noexcept { over_.clear(); }
   void rolledBack() noexcept;
@@ -91,6 +97,10 @@ class SessionTable {
   [[nodiscard]] int addEvent(platform::SessionNumber session, std::int64_t event);
   [[nodiscard]] int findIds();
   [[nodiscard]] int closeOlder();
+  // Changes each row of the table whose id (?1) a SELECT tells.
+  [[nodiscard]] int changeEach(SessionSums::Place place, const std::string& ids, const char* change);
+  [[nodiscard]] static int carryTable(Connection& from, Connection& into, const std::string& reading,
+                                      const std::string& table, std::int64_t& leftBehind);
   [[nodiscard]] int describe(const SessionNote& note);
   [[nodiscard]] int start(const SessionNote& note);
   [[nodiscard]] int closePeriod(const SessionNote& note);
@@ -106,10 +116,13 @@ class SessionTable {
   Statement stop_;
   Statement setEnd_;
   Statement noteAge_;
+  Statement repeat_;
+  SessionSums sums_;                 // through which every change of a row goes
   std::optional<std::int64_t> run_;  // once it is known
   // What was given before this run.
   std::int64_t sessions_ = 0;
   std::int64_t periodsBefore_ = 0;
+  std::int64_t repeatsBefore_ = 0;
   std::unordered_map<platform::SessionNumber, Period> periods_;
   // Closed by what isn't committed yet: open again after a rollback.
   std::vector<std::pair<platform::SessionNumber, Period>> over_;

@@ -7,6 +7,7 @@
 #include <string>
 #include <string_view>
 
+#include "recorder/store/SessionSums.h"
 #include "recorder/store/Statement.h"
 #include "recorder/store/StoreViews.h"
 
@@ -52,6 +53,16 @@ constexpr Made kTables[] = {
      "CREATE TABLE periods(id INTEGER PRIMARY KEY, session INTEGER, started REAL, stopped REAL, messages INTEGER, "
      "redundant INTEGER, first_event INTEGER, last_event INTEGER)"},
     {"periods_of_session", "CREATE INDEX periods_of_session ON periods(session)"},
+};
+
+// These came after the first files of this version, which lack them until they are opened to be written to. Nothing is
+// moved for that, so the version stays; a program that doesn't know them loses nothing but what they hold.
+constexpr Made kLaterTables[] = {
+    {"redundant_messages",
+     "CREATE TABLE redundant_messages(id INTEGER PRIMARY KEY, session INTEGER, period INTEGER, time REAL, stamp REAL, "
+     "event INTEGER, after_event INTEGER)"},
+    {"redundant_of_session", "CREATE INDEX redundant_of_session ON redundant_messages(session)"},
+    {"row_hashes", "CREATE TABLE row_hashes(id INTEGER PRIMARY KEY, hash INTEGER)"},
 };
 
 // The recorder's own notes beside the events, as in the first version. After "holds_after" every id is there, or noted
@@ -125,24 +136,38 @@ Result<std::int64_t> countNotes(Connection& connection) {
       "name IN ('recorder_state', 'event_groups', 'recorder_losses', 'recorder_times')");
 }
 
-// Whether the schema has exactly these, to the letter.
-Status checkAll(Connection& connection, std::span<const Made> all) {
+// Whether the schema has exactly these, to the letter; what it lacks is added to `missing`, or wrong without that.
+Status checkAll(Connection& connection, std::span<const Made> all, std::string* missing = nullptr) {
   Statement made;
   int code = made.prepare(connection.handle(), "SELECT sql FROM sqlite_schema WHERE name = ?1");
   for (const Made& wanted : all) {
     if (code != SQLITE_OK) break;
     code = made.bind(1, wanted.name).step();
     if (code != SQLITE_ROW && code != SQLITE_DONE) break;
-    if (code == SQLITE_DONE || made.text(0) != wanted.sql) return Error{SQLITE_MISMATCH, kForeignTables};
+    if (code == SQLITE_DONE && missing != nullptr) {
+      missing->append(wanted.sql).append(";");
+    } else if (code == SQLITE_DONE || made.text(0) != wanted.sql) {
+      return Error{SQLITE_MISMATCH, kForeignTables};
+    }
     made.reset();
     code = SQLITE_OK;
   }
   return connection.errorOf(code);
 }
 
-Status checkCurrentTables(Connection& connection) {
+// `missing`: what makes those that a file of this version may lack.
+Status checkCurrentTables(Connection& connection, std::string& missing) {
   Status error = checkAll(connection, kTables);
-  return error.ok() ? checkAll(connection, kNotes) : error;
+  error = error.ok() ? checkAll(connection, kNotes) : error;
+  return error.ok() ? checkAll(connection, kLaterTables, &missing) : error;
+}
+
+Status completeTables(Connection& connection) {
+  std::string missing;
+  const Status error = checkCurrentTables(connection, missing);
+  if (error.failed() || missing.empty()) return error;
+  // What rows without a checksum say now is all that is known of them.
+  return makeAtOnce(connection, missing + SessionSums::sealAll());
 }
 
 // What is right needs no transaction.
@@ -187,6 +212,7 @@ Status prepareConnection(Connection& connection) {
       "PRAGMA journal_mode=WAL; PRAGMA synchronous=FULL;"
       "PRAGMA cache_size=-8192; PRAGMA secure_delete=OFF; PRAGMA trusted_schema=OFF");
   if (code != SQLITE_OK) return connection.errorOf(code);
+  if (const int added = SessionSums::addFunction(connection); added != SQLITE_OK) return connection.errorOf(added);
   const Result<std::string> mode = connection.readText("PRAGMA journal_mode");
   if (mode.failed()) return mode.error;
   if (mode.value != "wal") {
@@ -205,7 +231,7 @@ Status checkPages(Connection& connection, bool indexes) {
 }
 
 std::string currentTables() {
-  return makeAll(kTables) + "PRAGMA user_version = " + std::to_string(kLayoutVersion) + ";";
+  return makeAll(kTables) + makeAll(kLaterTables) + "PRAGMA user_version = " + std::to_string(kLayoutVersion) + ";";
 }
 
 std::string currentViews() {
@@ -220,7 +246,8 @@ Status checkSchema(Connection& connection) {
   const Result<std::int64_t> version = readVersion(connection);
   if (version.failed()) return version.error;
   if (version.value == kLayoutVersion) {
-    Status error = checkCurrentTables(connection);
+    std::string missing;
+    Status error = checkCurrentTables(connection, missing);
     return error.ok() ? checkAll(connection, storeViews()) : error;
   }
   if (Status error = checkOlderTables(connection); error.failed()) return error;
@@ -236,7 +263,7 @@ Status checkTables(Connection& connection, std::int64_t lastId, Tables& found) {
   if (version.failed()) return version.error;
   if (version.value == kLayoutVersion) {
     found = Tables::Current;
-    Status error = checkCurrentTables(connection);
+    Status error = completeTables(connection);
     return error.ok() ? keepViews(connection) : error;
   }
   const Result<std::int64_t> ours = connection.readInteger(

@@ -44,7 +44,7 @@ struct EventSelect {
 // layouts; SQLITE_MISMATCH for others', SQLITE_CANTOPEN for those of a newer recorder: nothing is wrong with them.
 [[nodiscard]] Status checkSchema(Connection& connection);
 // The same, and makes the tables where there are none; ids of a fresh file go on after `lastId`. Adds the notes to a
-// file of an older recorder, and the views where they are missing or others.
+// file of an older recorder, tables that came later to one of this version, and views where they are missing or others.
 [[nodiscard]] Status checkTables(Connection& connection, std::int64_t lastId, Tables& found);
 // What makes the tables of this version, beside the notes, and what makes its views, given anew where they are there.
 std::string currentTables();

@@ -68,6 +68,14 @@ Result<StoreReport> inspectStore(const std::filesystem::path& file) {
   report.notedLost = check.knownLost();
   report.unproven = check.unproven();
   check.finalize();
+  SessionCheck sessions(connection);
+  Status rows = sessions.begin();
+  for (Status failed; !sessions.isDone();) {
+    failed = sessions.goOn(std::chrono::steady_clock::time_point::max());
+    rows = rows.ok() ? failed : rows;
+  }
+  report.damagedRows = sessions.damaged();
+  error = error.ok() ? rows : error;
   if (error.failed() && report.damage.empty()) {
     report.damage = error->text;
   }

@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "plist/Result.h"
+#include "recorder/store/SessionCheck.h"
 #include "recorder/store/StoreCheck.h"
 
 namespace tarn::recorder {
@@ -19,9 +20,12 @@ struct StoreReport {
   std::vector<IdRange> lost;       // ids of events that are gone or aren't as they were written
   std::vector<IdRange> notedLost;  // likewise, and the recorder knows
   std::vector<IdRange> unproven;   // ids of events whose checksum is damaged
+  DamagedRows damagedRows;         // beside the events
   std::string damage;              // of the pages, when there is any
   // Whether there is nothing to complain about.
-  bool isWhole() const noexcept { return lost.empty() && notedLost.empty() && unproven.empty() && damage.empty(); }
+  bool isWhole() const noexcept {
+    return lost.empty() && notedLost.empty() && unproven.empty() && countOf(damagedRows) == 0 && damage.empty();
+  }
 };
 
 // An error when the file isn't there, can't be read or isn't a recorder's. Reads all of it, which takes as long as

@@ -45,6 +45,11 @@ class RecordingSessionRecords final : public platform::SessionRecords {
     facts_.at(static_cast<std::size_t>(session) - 1) = facts;
   }
   void started(Number session) override { tell("started", session); }
+  void repeated(Number session, const plist::Dictionary& message) override {
+    tell("repeated", session);
+    const OwnMemory own;
+    repeated_.push_back(message);
+  }
   void stopped(Number session, std::uint64_t messages, std::uint64_t redundant) override {
     const OwnMemory own;
     tell("stopped", session, " messages=" + std::to_string(messages) + " redundant=" + std::to_string(redundant));
@@ -74,6 +79,8 @@ class RecordingSessionRecords final : public platform::SessionRecords {
     }
     return found;
   }
+  // The messages that were told as repeated.
+  const std::vector<plist::Dictionary>& repeatedMessages() const noexcept { return repeated_; }
   // Whose work the thread did, call by call.
   const std::vector<Number>& currents() const noexcept { return currents_; }
   // What is known of a session by now.
@@ -95,6 +102,7 @@ class RecordingSessionRecords final : public platform::SessionRecords {
   std::vector<Number> sessions_;  // call by call
   std::vector<Number> currents_;
   std::vector<platform::SessionFacts> facts_;
+  std::vector<plist::Dictionary> repeated_;
 };
 
 }  // namespace tarn::testing

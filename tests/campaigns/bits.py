@@ -13,7 +13,11 @@ from account import FIRST, begin_session, message
 from service import settled
 
 KEY, MESSAGES, UNCHECKPOINTED = 1, 400, 60
-ALL = "SELECT id, time, backend, name, payload, detail FROM events ORDER BY id"
+ALL = "SELECT id, time, backend, name, payload, detail, session FROM events ORDER BY id"
+# What can't change any more.
+ENDED = ("SELECT * FROM runs WHERE ended IS NOT NULL ORDER BY id",
+         "SELECT * FROM sessions WHERE ended IS NOT NULL ORDER BY id",
+         "SELECT * FROM periods WHERE stopped IS NOT NULL ORDER BY id")
 PAGE = 4096
 WRONG_USAGE = 64
 
@@ -56,9 +60,10 @@ DAMAGES = (flip,) * 7 + (cut, zero, swap)
 
 
 def rows_of(service):
+    """Of events, and of runs, sessions and periods that are over."""
     reader = service.reader()
     try:
-        return reader.execute(ALL).fetchall()
+        return [reader.execute(sql).fetchall() for sql in (ALL, *ENDED)]
     finally:
         reader.close()
 
@@ -188,7 +193,7 @@ class Trials:
         to look at by the message."""
         try:
             fill(self.service, FIRST + MESSAGES + UNCHECKPOINTED, 1)
-            return rows_of(self.service)[:len(self.rows)] == self.rows
+            return all(now[:len(before)] == before for now, before in zip(rows_of(self.service), self.rows))
         except (sqlite3.Error, wire.WireError, wire.Refused, OSError, UnicodeError):
             self.figures["unreadable"] += 1
             return False

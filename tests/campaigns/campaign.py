@@ -31,6 +31,7 @@ CAMPAIGNS = {
     "syscalls": ("syscalls", "each system call of store, start and socket fails once or is short: the account closes"),
     "allocations": ("allocations", "each allocation of scenarios, a start, an end fails: the service lives, serves"),
     "bits": ("bits", "flipped bits, cut, zeroed and swapped pages of every file: seen or harmless"),
+    "migration": ("migration", "SIGKILL while an older store is brought to the present layout: nothing is lost"),
     "powercut": ("powercut", "writes that weren't synchronised are dropped: what was committed is there, once"),
     "clock": ("clocksteps", "the wall clock steps by days and years, across restarts: no row is removed"),
     "peers": ("peers", "hostile peers beside a polite client: its waits and losses, and the service's memory"),

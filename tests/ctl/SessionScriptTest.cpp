@@ -42,7 +42,7 @@ class SessionScriptTest : public ::testing::Test {
   }
   // The script's steps; every line must be one.
   std::vector<ScriptStep> steps() {
-    const SessionScript script = scriptOf(session_, periods_, messages_);
+    const SessionScript script = scriptOf(session_, periods_, messages_, repeated_);
     EXPECT_TRUE(script.leftOut.empty());
     std::vector<ScriptStep> all;
     for (std::size_t i = 0; i < script.lines.size(); ++i) {
@@ -67,7 +67,14 @@ class SessionScriptTest : public ::testing::Test {
 
   recorder::SessionRow session_;
   std::vector<recorder::PeriodRow> periods_;
+  // The n-th row of a message that repeats that of an event, after another event.
+  void repeat(std::optional<std::int64_t> event, std::int64_t after, std::int64_t period, double stamp) {
+    const auto id = static_cast<std::int64_t>(repeated_.size()) + 1;
+    repeated_.push_back({id, period, stamp, stamp, event, after});
+  }
+
   std::vector<SessionMessage> messages_;
+  std::vector<recorder::RepeatedRow> repeated_;
 };
 
 using Told = std::vector<std::string>;
@@ -96,6 +103,52 @@ TEST_F(SessionScriptTest, MessagesStandBeforeBetweenAndAfterPeriods) {
   EXPECT_EQ(told(), (Told{"createReportingSession", "setServiceType", "Setup.Setup", "startReportingSessionForID",
                           "Playback.Start", "stopReportingSessionForID", "Volume.Generic", "startReportingSessionForID",
                           "Playback.Stop", "stopReportingSessionForID", "RouteChange.Generic"}));
+}
+
+TEST_F(SessionScriptTest, RepeatedMessagesStandWhereTheyCameWithTheirOwnStamps) {
+  add(5, "Playback.Start");
+  add(8, "Volume.Generic");
+  add(31, "Playback.Stop");
+  addPeriod(4, 9);
+  addPeriod(30, 40);
+  periods_[0].id = 1;
+  periods_[1].id = 2;
+  repeat(5, 6, 1, 6.5);
+  repeat(5, 25, 1, 24.5);  // others' events came before it
+  repeat(31, 70, 2, 50);
+  EXPECT_EQ(told(),
+            (Told{"createReportingSession", "setServiceType", "startReportingSessionForID", "Playback.Start",
+                  "Playback.Start", "Volume.Generic", "Playback.Start", "stopReportingSessionForID",
+                  "startReportingSessionForID", "Playback.Stop", "Playback.Stop", "stopReportingSessionForID"}));
+  const auto all = steps();
+  EXPECT_EQ(all[3].request.dictionary.get("tarnreporting_timestamp").asDouble(), 5);
+  EXPECT_EQ(all[4].request.dictionary.get("tarnreporting_timestamp").asDouble(), 6.5);
+  EXPECT_EQ(all[6].request.dictionary.get("tarnreporting_timestamp").asDouble(), 24.5);
+  EXPECT_EQ(all[6].request.dictionary.get("HostApplicationDisplayID").text(), "org.example.music");
+}
+
+TEST_F(SessionScriptTest, ARepeatedMessageOfWhichNothingIsKnownIsLeftOutAndTold) {
+  add(5, "Playback.Start");
+  add(7, "Session_Generic.Summary", kSummary);
+  addPeriod(4, 9);
+  periods_[0].id = 1;
+  repeat(std::nullopt, 5, 1, 6);
+  repeat(3, 5, 1, 6);  // gone
+  repeat(7, 7, 1, 8);  // the service's own
+  EXPECT_EQ(told(), (Told{"createReportingSession", "setServiceType", "startReportingSessionForID", "Playback.Start",
+                          "stopReportingSessionForID"}));
+  EXPECT_EQ(scriptOf(session_, periods_, messages_, repeated_).unknownRepeated, 2U);
+}
+
+TEST_F(SessionScriptTest, ARepeatedMessagesStampIsADateWhereTheFirstOnesWas) {
+  messages_.push_back(*messageOf({5, 5, "tally", "sys.oxbow.tarnkit.Playback.Start",
+                                  R"({"tarnreporting_timestamp":"2026-11-20T07:00:00Z"})", "{}"}));
+  addPeriod(4, 9);
+  periods_[0].id = 1;
+  repeat(5, 5, 1, 1795158001.25);
+  const plist::Dictionary message = steps().at(4).request.dictionary;
+  EXPECT_EQ(message.get("tarnreporting_timestamp").kind(), plist::Kind::Date);
+  EXPECT_EQ(message.get("tarnreporting_timestamp").asDouble(), 1795158001.25);
 }
 
 TEST_F(SessionScriptTest, PeriodsWithoutEventsAreThereToo) {

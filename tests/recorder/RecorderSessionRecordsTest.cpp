@@ -1,59 +1,24 @@
 // Rows of runs, sessions and periods, and whose event an event is.
-#include "recorder/RecorderSessionRecords.h"
-
-#include <optional>
-
 #include "recorder/store/StoreReport.h"
-#include "tests/recorder/RecorderFixture.h"
 #include "tests/recorder/faults/ChildProcess.h"
+#include "tests/recorder/store/RecordsFixture.h"
 
 namespace tarn::recorder {
 namespace {
 
 using platform::SessionEnd;
-using platform::SessionFacts;
 using platform::SessionNumber;
 using Rows = std::vector<std::string>;
 
-thread_local SessionNumber worksFor = 0;
-
-SessionNumber current() noexcept {
-  return worksFor;
-}
-
-SessionNumber enterSession(SessionNumber session) noexcept {
-  return std::exchange(worksFor, session);
-}
-
-class RecorderSessionRecordsTest : public RecorderFixture {
+class RecorderSessionRecordsTest : public RecordsFixture {
  protected:
-  RecorderSessionRecordsTest() {
-    options_.sessionOf = current;
-    options_.boot = "boot";
-    options_.version = "1.2.3";
-    clock_.setEpochSeconds(kNow);
+  // Whatever was written, the checksums say so.
+  void TearDown() override {
+    end();
+    const auto report = inspectStore(file());
+    ASSERT_TRUE(report.ok()) << report.error.text();
+    EXPECT_EQ(textOf(report.value.damagedRows), "");
   }
-  ~RecorderSessionRecordsTest() override { worksFor = 0; }
-
-  void begin() {
-    records_.emplace(start(), clock_, enterSession);
-    recorder_->waitUntilOpened();
-  }
-  void end() {
-    stop();
-    records_.reset();
-  }
-  SessionNumber create(std::int64_t reporter = 10) {
-    SessionFacts facts;
-    facts.reporter = reporter;
-    return records_->created(facts);
-  }
-  void recordFor(SessionNumber session, const std::string& name) {
-    records_->enter(session);
-    record(name);
-    records_->enter(0);
-  }
-  void waitSeconds(double seconds) { clock_.setEpochSeconds(clock_.epochSeconds() + seconds); }
   // A process that does this and then ends without a word.
   void crashAfter(const std::function<void()>& work) {
     ChildProcess child([this, &work] {
@@ -64,11 +29,6 @@ class RecorderSessionRecordsTest : public RecorderFixture {
     });
     ASSERT_EQ(child.wait(), 0);
   }
-  Rows sessions(const std::string& columns) { return ask(file(), "SELECT " + columns + " FROM sessions ORDER BY id"); }
-  Rows periods(const std::string& columns) { return ask(file(), "SELECT " + columns + " FROM periods ORDER BY id"); }
-
-  static constexpr double kNow = 1750000000;
-  std::optional<RecorderSessionRecords> records_;
 };
 
 TEST_F(RecorderSessionRecordsTest, ASessionHasARowWithWhatIsKnownOfIt) {

@@ -98,8 +98,37 @@ TEST_F(SessionChronicle, TellsOfTheMakingAndOfEachPeriodWithItsMessages) {
   session->start();
   send(*session, 4);
   session->stop();
-  EXPECT_EQ(told(), (Calls{"created 1", "started 1", "stopped 1 messages=3 redundant=2", "started 1",
-                           "stopped 1 messages=1 redundant=0"}));
+  EXPECT_EQ(told(), (Calls{"created 1", "started 1", "repeated 1", "repeated 1", "stopped 1 messages=3 redundant=2",
+                           "started 1", "stopped 1 messages=1 redundant=0"}));
+}
+
+TEST_F(SessionChronicle, TellsWhatARepeatedMessageSaidWhileTheSessionRuns) {
+  const auto session = makeSession();
+  send(*session, 1);
+  send(*session, 1);  // before the period
+  session->start();
+  send(*session, 2);
+  platform_.advance(1s);
+  send(*session, 2);
+  session->stop();
+  send(*session, 3);
+  send(*session, 3);  // after it
+  ASSERT_EQ(platform_.sessionRecords.repeatedMessages().size(), 1U);
+  const plist::Dictionary& repeated = platform_.sessionRecords.repeatedMessages().front();
+  EXPECT_EQ(repeated.get("value").asDouble(), 2);
+  EXPECT_EQ(repeated.get("tarnreporting_timestamp").asDouble(), now());
+  EXPECT_TRUE(repeated.get("audiotag").isText()) << "as the intake left it";
+}
+
+TEST_F(SessionChronicle, ARepeatedMessageThatCannotBeToldIsNotTaken) {
+  const auto session = makeSession();
+  session->start();
+  send(*session, 1);
+  platform_.sessionRecords.failAll("repeated");
+  EXPECT_THROW(send(*session, 1), std::bad_alloc);
+  platform_.sessionRecords.failAll("");
+  session->stop();
+  EXPECT_EQ(told().back(), "stopped 1 messages=1 redundant=0");
 }
 
 TEST_F(SessionChronicle, CountsWhatProducersDeriveAtTheStop) {

@@ -47,6 +47,10 @@ int checkStore(const Context& context) {
   printRanges(output, "lost", report.lost);
   printRanges(output, "noted-lost", report.notedLost);
   printRanges(output, "unproven", report.unproven);
+  for (std::size_t place = 0; place < report.damagedRows.size(); ++place) {
+    printRanges(output, "damaged-" + std::string(recorder::SessionSums::kTables.at(place).name),
+                report.damagedRows.at(place));
+  }
   if (!report.damage.empty()) {
     complain(printable(path) + " is " + printable(report.damage));
   }
@@ -58,11 +62,12 @@ int checkStore(const Context& context) {
 void addCheckCommand(CLI::App& app, Context& context) {
   CLI::App* command = app.add_subcommand("check", "Check what the service keeps");
   const auto store = std::make_shared<bool>(false);
-  command->add_flag("--store", *store, "Compare each event that was recorded with its checksum")->required();
+  command->add_flag("--store", *store, "Compare each event and session that was recorded with its checksum")
+      ->required();
   command->footer(
       "\nPrints how many events are whole, then one line for each range of ids that isn't: lost, noted-lost (the\n"
-      "recorder knows) or unproven (the event is there, its checksum is damaged). Exit status 0 only when all are "
-      "whole.\n"
+      "recorder knows) or unproven (the event is there, its checksum is damaged); and for ids of rows of sessions,\n"
+      "periods, runs and redundant_messages that aren't as they were written. Exit status 0 only when all are whole.\n"
       "Reads the recorder in the state directory and changes nothing; the service may run.\n\n"
       "Example:\n"
       "  tarnreportingctl check --store");

@@ -138,6 +138,21 @@ Result<std::vector<PeriodRow>> SessionReader::periods(std::int64_t first, std::i
   return found;
 }
 
+Result<std::vector<RepeatedRow>> SessionReader::repeated(std::int64_t session) {
+  Result<std::vector<RepeatedRow>> found;
+  const auto tables = connection_.integer("SELECT count(*) FROM sqlite_schema WHERE name = 'redundant_messages'");
+  if (tables == 0) return found;
+  found.error = answer(
+      "SELECT id, period, time, stamp, event, after_event FROM redundant_messages WHERE session = ?1 ORDER BY id",
+      [=](Statement& statement) { statement.bind(1, session); },
+      [&](const Statement& row) {
+        found.value.push_back(
+            {row.integer(0), integerOf(row, 1), row.real(2), realOf(row, 3), integerOf(row, 4), row.integer(5)});
+        return true;
+      });
+  return found;
+}
+
 Result<std::optional<EventRow>> SessionReader::newest(std::int64_t session, const std::string& name, std::int64_t first,
                                                       std::int64_t last) {
   Result<std::optional<EventRow>> found;

@@ -68,6 +68,16 @@ struct PeriodRow {
   std::optional<std::int64_t> lastEvent;
 };
 
+// A message that repeated an earlier one, where such are kept.
+struct RepeatedRow {
+  std::int64_t id = 0;
+  std::optional<std::int64_t> period;
+  double time = 0;                    // when it came
+  std::optional<double> stamp;        // its own
+  std::optional<std::int64_t> event;  // whose message it repeats; nothing where that isn't known
+  std::int64_t afterEvent = 0;        // the last event, of anybody's, that was handed over before it
+};
+
 // Which sessions; all that is given must hold.
 struct SessionQuery {
   // Epoch seconds: sessions that were there at any time from the one to before the other.
@@ -105,6 +115,8 @@ class SessionReader {
   // Of all sessions from the first to the last, both included, by session and id.
   Result<std::vector<PeriodRow>> periods(std::int64_t first, std::int64_t last);
   Result<std::vector<PeriodRow>> periods(std::int64_t session) { return periods(session, session); }
+  // In the order in which they came; none in a file that keeps none.
+  Result<std::vector<RepeatedRow>> repeated(std::int64_t session);
   // The newest event of a name that a session has between two ids, both included; it is looked for from the end.
   Result<std::optional<EventRow>> newest(std::int64_t session, const std::string& name, std::int64_t first,
                                          std::int64_t last);

@@ -52,6 +52,7 @@ trace_analysis = "/opt/analysis.so"
 max_megabytes = 1
 max_age_days = 7
 summary_max_age_days = 14
+redundant = "mark"
 [limits]
 max_frame_bytes = 65536
 )",
@@ -69,6 +70,7 @@ max_frame_bytes = 65536
   EXPECT_EQ(host.paths.alsa, "/proc/asound");
   EXPECT_EQ(host.paths.traceAnalysis, "/opt/analysis.so");
   EXPECT_EQ(host.recorder.maxMegabytes, 1);
+  EXPECT_EQ(host.recorder.redundant, recorder::Redundant::Mark);
   EXPECT_EQ(host.recorder.maxAgeDays, 7);
   EXPECT_EQ(host.recorder.summaryMaxAgeDays, 14);
   EXPECT_EQ(host.limits.maxFrameBytes, 65536U);
@@ -115,6 +117,17 @@ TEST(HostConfiguration, ARefusalIsTheNameOfAReasonCode) {
   for (const char* wrong : {"dailylimitexceeded", "DailyLimitExceeded ", "6", "kAilmentErrorNone"}) {
     EXPECT_EQ(errorOf("\n[snare]\nrefuse = \"" + std::string(wrong) + "\"\n"),
               "c.toml:3: \"snare.refuse\" must be the name of a reason code, or empty");
+  }
+}
+
+TEST(HostConfiguration, WhatIsKeptOfRepeatedMessagesIsOneOfTwoWords) {
+  const Result<HostConfiguration> count = parseConfiguration("[recorder]\nredundant = \"count\"\n", "c.toml");
+  ASSERT_TRUE(count.ok()) << count.error->text;
+  EXPECT_EQ(count.value.recorder.redundant, recorder::Redundant::Count);
+  EXPECT_EQ(parseConfiguration("", "c.toml").value.recorder.redundant, recorder::Redundant::Count);
+  for (const char* wrong : {"\"Mark\"", "\"\"", "true", "1"}) {
+    EXPECT_EQ(errorOf("\n[recorder]\nredundant = " + std::string(wrong) + "\n"),
+              "c.toml:3: \"recorder.redundant\" must be \"count\" or \"mark\"");
   }
 }
 

@@ -1,24 +1,13 @@
 // The views by which people read the store, on a stream as the service hands it over.
-#include "recorder/RecorderSessionRecords.h"
-#include "tests/recorder/RecorderFixture.h"
+#include "tests/recorder/store/RecordsFixture.h"
 
 namespace tarn::recorder {
 namespace {
 
-using platform::SessionNumber;
 using Rows = std::vector<std::string>;
 
-thread_local SessionNumber worksFor = 0;
-
-SessionNumber current() noexcept {
-  return worksFor;
-}
-
-class StoreViews : public RecorderFixture {
+class StoreViews : public RecordsFixture {
  protected:
-  StoreViews() { options_.sessionOf = current; }
-  ~StoreViews() override { worksFor = 0; }
-
   // As the analytics worker and the mirror hand a message over.
   void message(const std::string& kind, const Dictionary& payload) {
     recorder_->record("tally", "sys.oxbow.tarnkit." + kind, payload, {}, 5);
@@ -33,7 +22,7 @@ class StoreViews : public RecorderFixture {
 
 TEST_F(StoreViews, MessagesAreThereOnceWithTheirCommonKeys) {
   start();
-  worksFor = 7;
+  workFor(7);
   message("Playback.Start", {{"audiotag", "PlaybackStart"},
                              {"HostApplicationDisplayID", "org.example.music"},
                              {"tarnreporting_timestamp", 1750000000.5},
@@ -50,7 +39,7 @@ TEST_F(StoreViews, MessagesAreThereOnceWithTheirCommonKeys) {
 
 TEST_F(StoreViews, DerivedMessagesHaveViewsOfTheirOwn) {
   start();
-  worksFor = 7;
+  workFor(7);
   message("Volume.Summary", {{"audiotag", "VolumeSummary"},
                              {"play_seconds", 20},
                              {"KvSessionVolume", 0.5},
@@ -91,7 +80,7 @@ TEST_F(StoreViews, DriverCountersAreOneRowAChannel) {
 TEST_F(StoreViews, EventsBySessionAndByNameAreTheEvents) {
   start();
   for (int i = 0; i < 2000; ++i) {
-    worksFor = i % 3;
+    workFor(i % 3);
     record("event" + std::to_string(i % 5), {{"n", i}});
     if (i % 250 == 0) {
       ASSERT_TRUE(flush());
@@ -101,7 +90,7 @@ TEST_F(StoreViews, EventsBySessionAndByNameAreTheEvents) {
       start();
     }
   }
-  worksFor = 0;
+  workFor(0);
   const std::string ofSession = " WHERE session = 2 ORDER BY id";
   EXPECT_EQ(rows("*", "v_events_by_session" + ofSession), rows("*", "events" + ofSession));
   EXPECT_EQ(rows("count(*)", "v_events_by_session"), rows("count(session)", "events"));

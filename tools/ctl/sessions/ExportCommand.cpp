@@ -68,11 +68,15 @@ int printJson(const Terminal& terminal, SessionReader& reader, const SessionRow&
 }
 
 int printScript(const SessionRow& row, const std::vector<recorder::PeriodRow>& periods,
-                const std::vector<SessionMessage>& messages) {
-  const SessionScript script = scriptOf(row, periods, messages);
+                const std::vector<SessionMessage>& messages, const std::vector<recorder::RepeatedRow>& repeated) {
+  const SessionScript script = scriptOf(row, periods, messages, repeated);
   const int status = printLines(script.lines);
   for (const std::int64_t event : script.leftOut) {
     complain("the message of event " + std::to_string(event) + " can't be said in a script; it is left out");
+  }
+  if (script.unknownRepeated > 0) {
+    complain(std::to_string(script.unknownRepeated) +
+             " repeated messages are left out: what they repeat isn't recorded or is gone");
   }
   return script.leftOut.empty() ? status : kFailure;
 }
@@ -88,7 +92,9 @@ int exportSession(const Context& context, const Arguments& arguments) {
     if (messages.failed()) return sessionFailure(row.id, messages.error);
     if (arguments.format == "csv") return printLines(tableOf(messages.value));
     if (arguments.format == "trace") return printLines(traceOf(row, periods.value, messages.value, currentTime()));
-    return printScript(row, periods.value, messages.value);
+    const auto repeated = reader.repeated(row.id);
+    if (repeated.failed()) return sessionFailure(row.id, repeated.error);
+    return printScript(row, periods.value, messages.value, repeated.value);
   });
 }
 
@@ -108,8 +114,8 @@ void addExportCommand(CLI::App& app, Context& context) {
       "  trace   its timeline as a Chrome trace, which the usual viewers of traces open\n"
       "  script  its messages, starts and stops for \"run\", which derives the same of them: stamps are kept. "
       "Repeated\n"
-      "          messages are not in it, nor is what the service itself derived. A stamp that is more than a year old\n"
-      "          when it is played is replaced by the service.\n"
+      "          messages are in it where [recorder] redundant is \"mark\"; what the service itself derived is not. A\n"
+      "          stamp that is more than a year old when it is played is replaced by the service.\n"
       "Reads the recorder in the state directory; the service need not run.\n\n"
       "Examples:\n"
       "  tarnreportingctl export 12 --format trace > session.json\n"

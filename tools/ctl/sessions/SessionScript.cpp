@@ -1,6 +1,7 @@
 #include "tools/ctl/sessions/SessionScript.h"
 
 #include <algorithm>
+#include <limits>
 #include <optional>
 #include <utility>
 
@@ -15,6 +16,7 @@ namespace tarn::ctl {
 namespace {
 
 using recorder::PeriodRow;
+using recorder::RepeatedRow;
 using recorder::SessionRow;
 
 // The name where a script may write it, else the number.
@@ -31,8 +33,9 @@ void addNamed(JsonObject& line, std::string_view member, const std::string& name
 // A session's messages, starts and stops, told one after the other.
 class Writer {
  public:
-  Writer(const SessionRow& session, const std::vector<PeriodRow>& periods, const std::vector<SessionMessage>& messages)
-      : session_(session), periods_(periods), messages_(messages) {}
+  Writer(const SessionRow& session, const std::vector<PeriodRow>& periods, const std::vector<SessionMessage>& messages,
+         const std::vector<RepeatedRow>& repeated)
+      : session_(session), periods_(periods), messages_(messages), repeated_(repeated) {}
 
   SessionScript write();
 
@@ -42,10 +45,13 @@ class Writer {
   void add(const JsonObject& line) { script_.lines.push_back(line.text()); }
   void addOperation(std::string_view op);
   void addMessage(const SessionMessage& message);
+  void addRepeatedBefore(std::int64_t event);
+  void addRepeated(const RepeatedRow& row);
   void addConfigurationBefore(const SessionMessage& message);
   void addConfiguration();
   // Starts and stops that came before this message.
   void goTo(const SessionMessage& message);
+  void goTo(const RepeatedRow& row);
   void startNext();
   void stopCurrent();
   bool wasSummarised(const PeriodRow& period) const;
@@ -53,9 +59,11 @@ class Writer {
   const SessionRow& session_;
   const std::vector<PeriodRow>& periods_;
   const std::vector<SessionMessage>& messages_;
+  const std::vector<RepeatedRow>& repeated_;
   SessionScript script_;
-  std::size_t next_ = 0;    // period to be started
-  bool isRunning_ = false;  // the one before that
+  std::size_t next_ = 0;          // period to be started
+  std::size_t nextRepeated_ = 0;  // to be added
+  bool isRunning_ = false;        // the period before that
   bool isConfigured_ = false;
 };
 
@@ -105,6 +113,34 @@ void Writer::addMessage(const SessionMessage& message) {
   add(line.addJson("message", *text));
 }
 
+// Those that came before the event.
+void Writer::addRepeatedBefore(std::int64_t event) {
+  for (; nextRepeated_ < repeated_.size() && repeated_[nextRepeated_].afterEvent < event; ++nextRepeated_) {
+    addRepeated(repeated_[nextRepeated_]);
+  }
+}
+
+// As the message that it repeats, but for its stamp.
+void Writer::addRepeated(const RepeatedRow& row) {
+  const auto found =
+      std::lower_bound(messages_.begin(), messages_.end(), row.event.value_or(0),
+                       [](const SessionMessage& message, std::int64_t id) { return message.event < id; });
+  if (!row.event || found == messages_.end() || found->event != *row.event) {
+    ++script_.unknownRepeated;
+    return;
+  }
+  if (found->isDerived) return;
+  SessionMessage message = *found;
+  const plist::ValueView stamp = message.payload.get(keys::kTimestamp);
+  const bool isDate = stamp.isText() && secondsOfDateText(stamp.text());
+  if (row.stamp) {
+    isDate ? message.payload.set(keys::kTimestamp, plist::Date{*row.stamp})
+           : message.payload.set(keys::kTimestamp, *row.stamp);
+  }
+  goTo(row);
+  addMessage(message);
+}
+
 bool Writer::wasSummarised(const PeriodRow& period) const {
   return std::any_of(messages_.begin(), messages_.end(), [&](const SessionMessage& message) {
     return isSessionSummary(message) && message.event >= period.firstEvent.value_or(0) &&
@@ -148,6 +184,13 @@ void Writer::goTo(const SessionMessage& message) {
   }
 }
 
+// Which period it came in is known, unlike of an event.
+void Writer::goTo(const RepeatedRow& row) {
+  while (row.period && next_ < periods_.size() && periods_[next_].id <= *row.period) {
+    isRunning_ ? stopCurrent() : startNext();
+  }
+}
+
 SessionScript Writer::write() {
   if (isOfTheService()) {
     for (const SessionMessage& message : messages_) {
@@ -166,12 +209,14 @@ SessionScript Writer::write() {
     add(line);
   }
   for (const SessionMessage& message : messages_) {
+    addRepeatedBefore(message.event);
     goTo(message);
     addConfigurationBefore(message);
     if (!message.isDerived) {
       addMessage(message);
     }
   }
+  addRepeatedBefore(std::numeric_limits<std::int64_t>::max());
   addConfiguration();
   while (isRunning_ || next_ < periods_.size()) {
     isRunning_ ? stopCurrent() : startNext();
@@ -185,8 +230,8 @@ SessionScript Writer::write() {
 }  // namespace
 
 SessionScript scriptOf(const SessionRow& session, const std::vector<PeriodRow>& periods,
-                       const std::vector<SessionMessage>& messages) {
-  return Writer(session, periods, messages).write();
+                       const std::vector<SessionMessage>& messages, const std::vector<RepeatedRow>& repeated) {
+  return Writer(session, periods, messages, repeated).write();
 }
 
 }  // namespace tarn::ctl
