@@ -35,6 +35,7 @@
 #include "recorder/store/Statement.h"
 #include "recorder/store/StoreCheck.h"
 #include "recorder/store/files/StoreFiles.h"
+#include "recorder/store/retention/FileAges.h"
 
 namespace tarn::recorder {
 
@@ -92,6 +93,9 @@ class EventFile {
   // Takes over the rows of runs, sessions and periods that another file has, as far as they can be read. In a
   // transaction, after the last carry().
   [[nodiscard]] Status carrySessions(Connection& from);
+  // What the file knows of the ages of others, and what it is to know; the second in a transaction.
+  [[nodiscard]] Status readAges(FileAges& ages) { return connection_.errorOf(ages.read(connection_)); }
+  [[nodiscard]] Status writeAges(const FileAges& ages) { return rollbackAfter(ages.write(connection_)); }
   // Removes what retention doesn't keep, until `deadline` at the latest; in a transaction, after its appends.
   [[nodiscard]] Status expire(std::chrono::steady_clock::time_point deadline);
   // Ends the transaction and synchronises it: what was appended is safe when this succeeds.
