@@ -50,7 +50,7 @@ recorder::RecorderOptions recorderOptions(const HostConfiguration& configuration
   recorder::RecorderOptions options = configuration.recorder;
   options.file = stateDirectory + "/recorder.sqlite3";
   const std::string logs = configuration.paths.diagnosticLogs.value_or(stateDirectory) + "/DiagnosticLogs/Audio/";
-  options.folders = {logs + "Reporting", logs + "Traces"};
+  options.files = recorder::diagnosticFileKinds(logs, options.fileMaxAges);
   options.others = overflow.size();
   options.sessionOf = &WorkOwner::current;
   options.version = TARN_VERSION;

@@ -61,7 +61,7 @@ EventWriter::EventWriter(const RecorderOptions& options, platform::Log& log, con
       clock_(clock),
       log_(log),
       file_(options.file, limitsOf(options), clock, options.boot.empty() ? RecorderTime::currentBoot() : options.boot),
-      usage_(options.file, options.folders, capOf(options), options.others),
+      usage_(options.file, options.fileMaxAges.setAside, options.files, capOf(options), options.others),
       pace_(options.commitWindow, options.fewestWaiting),
       started_(clock.epochSeconds()) {
   file_.setLogLimit(logLimit(options));
@@ -81,6 +81,7 @@ bool EventWriter::open() {
 Status EventWriter::openOnce() {
   if (!file_.isOpen()) {
     if (auto error = file_.open(); error.failed()) return error;
+    if (auto error = file_.readAges(ages_); error.failed()) return error;
     tidy();
     tellWhatOpeningFound();
   }
@@ -145,9 +146,12 @@ Status EventWriter::noteMissing() {
 
 void EventWriter::tidy() {
   if (!carrying_) {
-    for (const std::string& name : usage_.tidy()) {
-      log_.notice("recorder removed " + name + ": its kind is over its share");
+    const double now = file_.seconds();
+    for (const auto& removed : usage_.tidy([&](const std::string& path) { return now - ages_.firstSeen(path, now); })) {
+      log_.notice("recorder removed the " + removed.kind + " " + removed.name +
+                  (removed.isOld ? ": it is too old" : ": its kind is over its share"));
     }
+    ages_.forgetOthers();
   }
   limitDatabase();
 }
@@ -331,10 +335,16 @@ Status EventWriter::maintainOnce() {
     error = file_.begin();
   }
   if (error.ok()) {
+    error = file_.writeAges(ages_);
+  }
+  if (error.ok()) {
     error = file_.expire(SteadyClock::now() + kExpireTime);
   }
   if (error.ok()) {
     error = file_.commit();
+  }
+  if (error.ok()) {
+    ages_.written();
   }
   return error;
 }

@@ -119,6 +119,7 @@ class EventWriter {
   // What it writes to, and what else lies beside that under the same cap.
   EventFile file_;
   StateUsage usage_;
+  FileAges ages_;  // of that
   CommitPace pace_;
   NewestMessages newest_;          // while repeated ones are marked
   plist::Dictionary lastPayload_;  // whose text payloadText_ is

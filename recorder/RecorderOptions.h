@@ -11,6 +11,8 @@
 #include <string>
 #include <vector>
 
+#include "recorder/store/files/FileKinds.h"
+
 namespace tarn::recorder {
 
 // What is kept of a message that repeats an earlier one.
@@ -26,9 +28,10 @@ struct RecorderOptions {
 
   // Retention: beyond the size the oldest messages of the user with most go first, and summaries last. A megabyte is
   // 2^20 bytes; at least one is kept. The size is that of the database with its log, of files set aside, and of the
-  // files in these folders; see StateUsage.
+  // files of these kinds; see StateUsage.
   std::int64_t maxMegabytes = 256;
-  std::vector<std::filesystem::path> folders;
+  std::vector<FileKind> files;
+  FileMaxAges fileMaxAges;
   // What else counts as part of that size: bytes that others keep for a while; null: none.
   std::shared_ptr<const std::atomic<std::int64_t>> others;
   // How old messages get, and what was made of them; that is no less.

@@ -127,7 +127,7 @@ struct Setting {
 
 using Node = const toml::node&;
 using Host = HostConfiguration&;
-constexpr std::array<Setting, 29> kSettings{{
+constexpr std::array<Setting, 33> kSettings{{
     {"tally", "in_use", [](Node node, Host host) { return take(node, host.tally.inUse); }},
     {"rtc", "backends", [](Node node, Host host) { return take(node, host.rtc.backends); }},
     {"rtc", "no_backends", [](Node node, Host host) { return take(node, host.rtc.noBackends); }},
@@ -147,6 +147,14 @@ constexpr std::array<Setting, 29> kSettings{{
     {"recorder", "summary_max_age_days",
      [](Node node, Host host) { return takeWithin<1, 36500>(node, host.recorder.summaryMaxAgeDays); }},
     {"recorder", "redundant", [](Node node, Host host) { return take(node, host.recorder.redundant); }},
+    {"recorder", "set_aside_max_age_days",
+     [](Node node, Host host) { return takeWithin<1, 36500>(node, host.recorder.fileMaxAges.setAside); }},
+    {"recorder", "summary_file_max_age_days",
+     [](Node node, Host host) { return takeWithin<1, 36500>(node, host.recorder.fileMaxAges.summaryFiles); }},
+    {"recorder", "trace_max_age_days",
+     [](Node node, Host host) { return takeWithin<1, 36500>(node, host.recorder.fileMaxAges.traces); }},
+    {"recorder", "perf_data_max_age_days",
+     [](Node node, Host host) { return takeWithin<1, 36500>(node, host.recorder.fileMaxAges.perfData); }},
     {"limits", "max_frame_bytes",
      [](Node node, Host host) { return takeWithin<64, 67108864>(node, host.limits.maxFrameBytes); }},
     {"limits", "half_frame_ms",

@@ -31,11 +31,12 @@
 #include "recorder/store/EventTable.h"
 #include "recorder/store/RecorderTime.h"
 #include "recorder/store/Retention.h"
-#include "recorder/store/SessionCheck.h"
-#include "recorder/store/SessionTable.h"
 #include "recorder/store/Statement.h"
 #include "recorder/store/StoreCheck.h"
 #include "recorder/store/files/StoreFiles.h"
+#include "recorder/store/retention/FileAges.h"
+#include "recorder/store/sessions/SessionCheck.h"
+#include "recorder/store/sessions/SessionTable.h"
 
 namespace tarn::recorder {
 
@@ -95,6 +96,9 @@ class EventFile {
   // Takes over the rows of runs, sessions, periods and repeated messages that another file has, as far as they can be
   // read and are as they were written; the others are counted. In a transaction, after the last carry().
   [[nodiscard]] Status carrySessions(Connection& from, std::int64_t& leftBehind);
+  // What the file knows of the ages of others, and what it is to know; the second in a transaction.
+  [[nodiscard]] Status readAges(FileAges& ages) { return connection_.errorOf(ages.read(connection_)); }
+  [[nodiscard]] Status writeAges(const FileAges& ages) { return rollbackAfter(ages.write(connection_)); }
   // Removes what retention doesn't keep, until `deadline` at the latest; in a transaction, after its appends.
   [[nodiscard]] Status expire(std::chrono::steady_clock::time_point deadline);
   // Ends the transaction and synchronises it: what was appended is safe when this succeeds.

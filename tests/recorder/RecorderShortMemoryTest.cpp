@@ -188,9 +188,10 @@ TEST_F(RecorderShortMemory, ALookAtTheStateDirectoryIsGivenUpWithoutEndingThePro
   for (const char* const name : {".damaged-1", ".damaged-2"}) {
     std::ofstream(file().string() + name) << std::string(3000, 'x');
   }
-  std::vector<std::string> removed{"not looked yet"};
-  StateUsage usage(file(), {file().parent_path()}, 1'000'000);
-  const int failed = tarn::testing::failEachAllocation([&] { removed = usage.tidy(); }, [] {});
+  std::vector<StateUsage::Removed> removed{{"not looked yet", "", false}};
+  StateUsage usage(file(), 90, {{"summary file", file().parent_path(), "", true, 4, 90}}, 1'000'000);
+  const auto isNew = [](const std::string&) { return 0.0; };
+  const int failed = tarn::testing::failEachAllocation([&] { removed = usage.tidy(isNew); }, [] {});
   EXPECT_GT(failed, 5);
   EXPECT_TRUE(removed.empty());
 }

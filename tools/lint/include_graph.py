@@ -19,7 +19,8 @@ GROUND = BASE + ("host/system", "host/log")
 HOST = ("host/system", "host/log", "host/loop", "host/socket", "host/settings", "host/machine", "host/drivers",
         "host/ring", "host/traces", "host/traces/analysis")
 # The recorder's database, and what lies beside it.
-STORE = ("recorder/store", "recorder/store/files", "recorder/store/reading", "recorder/store/retention")
+STORE = ("recorder/store", "recorder/store/files", "recorder/store/reading", "recorder/store/retention",
+         "recorder/store/sessions")
 PROGRAM = SESSION + WORKERS + ("service", "wire", "recorder") + STORE + HOST + ("host",)
 
 # Each folder, from the ground up, and what its files may include beside files of its own. The worker families don't
@@ -44,9 +45,10 @@ ROOMS = {
     **{folder: SESSION for folder in WORKERS},
     "service": SESSION + WORKERS,
     "recorder/store/files": BASE,
-    "recorder/store": BASE + ("recorder/store/files", "recorder/store/retention"),
+    "recorder/store": BASE + ("recorder/store/files", "recorder/store/retention", "recorder/store/sessions"),
+    "recorder/store/sessions": BASE + ("recorder/store/files", "recorder/store"),
     # How the store forgets is a part of it, in a folder of its own.
-    "recorder/store/retention": BASE + ("recorder/store/files", "recorder/store"),
+    "recorder/store/retention": BASE + ("recorder/store/files", "recorder/store", "recorder/store/sessions"),
     "recorder/store/reading": BASE + ("recorder/store/files", "recorder/store", "recorder/store/retention"),
     "recorder": BASE + ("service/vocabulary",) + STORE,
     "host/system": BASE,

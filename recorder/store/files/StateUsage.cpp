@@ -9,20 +9,22 @@
 #include <algorithm>
 #include <cerrno>
 #include <fstream>
+#include <functional>
 #include <memory>
 #include <new>
 #include <sstream>
 #include <string_view>
 #include <system_error>
 #include <tuple>
+#include <utility>
 
 namespace tarn::recorder {
 
 namespace {
 
-constexpr std::int64_t kAsideShare = 4;   // a fourth of the cap
-constexpr std::int64_t kFolderShare = 8;  // an eighth of it, each folder
-constexpr std::int64_t kLeastShare = 4;   // the database has a fourth at the least
+constexpr std::int64_t kShares = 32;
+constexpr std::int64_t kLeastShare = 4;  // the database has a fourth at the least
+constexpr double kSecondsADay = 86'400;
 
 struct Found {
   std::filesystem::path path;
@@ -31,7 +33,7 @@ struct Found {
 };
 
 // By the system's own calls: the standard library's walk ends the process when no memory is left for a name.
-std::vector<Found> filesOf(const std::filesystem::path& folder, std::string_view prefix) {
+std::vector<Found> filesOf(const std::filesystem::path& folder, const std::function<bool(std::string_view)>& isOne) {
   std::vector<Found> found;
   const std::unique_ptr<DIR, int (*)(DIR*)> entries(::opendir(folder.c_str()), &::closedir);
   if (entries == nullptr) {
@@ -40,7 +42,7 @@ std::vector<Found> filesOf(const std::filesystem::path& folder, std::string_view
   }
   while (const dirent* const entry = ::readdir(entries.get())) {
     struct stat status {};
-    if (!std::string_view(entry->d_name).starts_with(prefix)) continue;
+    if (!isOne(entry->d_name)) continue;
     if (::fstatat(::dirfd(entries.get()), entry->d_name, &status, AT_SYMLINK_NOFOLLOW) != 0) continue;
     if (!S_ISREG(status.st_mode)) continue;
     found.push_back({folder / entry->d_name, std::int64_t{status.st_size},
@@ -49,20 +51,38 @@ std::vector<Found> filesOf(const std::filesystem::path& folder, std::string_view
   return found;
 }
 
-// Removes from the front until the rest is within the share; what the rest takes.
-std::int64_t keepWithin(const std::vector<Found>& files, std::int64_t share, std::vector<std::string>& removed) {
+// Removes what is too old, then from the front until the rest is within the kind's share; what the rest takes.
+std::int64_t keepWithin(const std::vector<Found>& files, const FileKind& kind, std::int64_t cap,
+                        const StateUsage::AgeOf& ageOf, std::vector<StateUsage::Removed>& removed) {
   std::int64_t bytes = 0;
   for (const Found& file : files) {
     bytes += file.bytes;
   }
+  std::vector<bool> isOld;
   for (const Found& file : files) {
-    if (bytes <= share) break;
-    std::error_code error;
-    if (!std::filesystem::remove(file.path, error)) continue;
-    bytes -= file.bytes;
-    removed.push_back(file.path.filename().string());
+    isOld.push_back(ageOf(file.path.string()) > kind.maxAgeDays * kSecondsADay);
+  }
+  for (const bool old : {true, false}) {
+    for (std::size_t i = 0; i < files.size(); ++i) {
+      if (old ? !isOld[i] : isOld[i] || bytes <= cap * kind.share / kShares) continue;
+      std::error_code error;
+      const Found& file = files[i];
+      removed.reserve(removed.size() + 1);
+      StateUsage::Removed told{file.path.filename().string(), kind.name, old};
+      if (!std::filesystem::remove(file.path, error)) continue;
+      bytes -= file.bytes;
+      removed.push_back(std::move(told));
+    }
   }
   return bytes;
+}
+
+// Of a folder with several kinds each file is of one.
+bool isOf(const FileKind& kind, const std::vector<FileKind>& kinds, std::string_view name) {
+  if (!kind.isRest) return name.ends_with(kind.suffix);
+  return std::none_of(kinds.begin(), kinds.end(), [&](const FileKind& other) {
+    return !other.isRest && other.folder == kind.folder && name.ends_with(other.suffix);
+  });
 }
 
 std::int64_t sizeOf(const std::string& path) {
@@ -72,17 +92,18 @@ std::int64_t sizeOf(const std::string& path) {
 
 }  // namespace
 
-std::vector<std::string> StateUsage::tidy() {
-  std::vector<std::string> removed;
-  std::vector<Found> aside = filesOf(file_.parent_path(), file_.filename().string() + ".damaged-");
+std::vector<StateUsage::Removed> StateUsage::tidy(const AgeOf& ageOf) {
+  std::vector<Removed> removed;
+  const std::string prefix = file_.filename().string() + ".damaged-";
+  std::vector<Found> aside = filesOf(aside_.folder, [&](std::string_view name) { return name.starts_with(prefix); });
   std::sort(aside.begin(), aside.end(), [](const Found& one, const Found& other) { return one.path > other.path; });
-  beside_ = keepWithin(aside, cap_ / kAsideShare, removed);
-  for (const std::filesystem::path& folder : folders_) {
-    std::vector<Found> files = filesOf(folder, "");
+  beside_ = keepWithin(aside, aside_, cap_, ageOf, removed);
+  for (const FileKind& kind : kinds_) {
+    std::vector<Found> files = filesOf(kind.folder, [&](std::string_view name) { return isOf(kind, kinds_, name); });
     std::sort(files.begin(), files.end(), [](const Found& one, const Found& other) {
       return std::tie(one.changed, one.path) < std::tie(other.changed, other.path);
     });
-    beside_ += keepWithin(files, cap_ / kFolderShare, removed);
+    beside_ += keepWithin(files, kind, cap_, ageOf, removed);
   }
   beside_ += sizeOf(file_.string() + "-shm") + sizeOf(file_.string() + ".counts");
   return removed;

@@ -53,6 +53,10 @@ max_megabytes = 1
 max_age_days = 7
 summary_max_age_days = 14
 redundant = "mark"
+set_aside_max_age_days = 15
+summary_file_max_age_days = 16
+trace_max_age_days = 17
+perf_data_max_age_days = 18
 [limits]
 max_frame_bytes = 65536
 )",
@@ -73,6 +77,7 @@ max_frame_bytes = 65536
   EXPECT_EQ(host.recorder.redundant, recorder::Redundant::Mark);
   EXPECT_EQ(host.recorder.maxAgeDays, 7);
   EXPECT_EQ(host.recorder.summaryMaxAgeDays, 14);
+  EXPECT_EQ(host.recorder.fileMaxAges, (recorder::FileMaxAges{15, 16, 17, 18}));
   EXPECT_EQ(host.limits.maxFrameBytes, 65536U);
 }
 
@@ -138,11 +143,10 @@ TEST(HostConfiguration, NumbersAreReadToTheirLimitsAndRefusedBehindThem) {
     std::int64_t lowest;
     std::int64_t highest;
   };
-  const std::vector<Range> ranges{{"rtc", "start_delay_ms", 0, 3600000},
-                                  {"recorder", "max_megabytes", 1, 1048576},
-                                  {"recorder", "max_age_days", 1, 36500},
-                                  {"recorder", "summary_max_age_days", 1, 36500},
-                                  {"limits", "max_frame_bytes", 64, 67108864}};
+  const std::vector<Range> ranges{
+      {"rtc", "start_delay_ms", 0, 3600000},        {"recorder", "max_megabytes", 1, 1048576},
+      {"recorder", "max_age_days", 1, 36500},       {"recorder", "summary_max_age_days", 1, 36500},
+      {"recorder", "trace_max_age_days", 1, 36500}, {"limits", "max_frame_bytes", 64, 67108864}};
   for (const Range& range : ranges) {
     const auto with = [&](std::int64_t number) {
       return errorOf("[" + range.section + "]\n" + range.key + " = " + std::to_string(number) + "\n");

@@ -20,8 +20,8 @@
 
 #include "platform/SessionRecords.h"
 #include "recorder/store/Connection.h"
-#include "recorder/store/SessionSums.h"
 #include "recorder/store/Statement.h"
+#include "recorder/store/sessions/SessionSums.h"
 
 namespace tarn::recorder {
 

@@ -1,4 +1,4 @@
-#include "recorder/store/SessionTable.h"
+#include "recorder/store/sessions/SessionTable.h"
 
 #include <sqlite3.h>
 

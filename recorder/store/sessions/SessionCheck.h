@@ -10,9 +10,9 @@
 
 #include "plist/Result.h"
 #include "recorder/store/Connection.h"
-#include "recorder/store/SessionSums.h"
 #include "recorder/store/Statement.h"
 #include "recorder/store/StoreCheck.h"
+#include "recorder/store/sessions/SessionSums.h"
 
 namespace tarn::recorder {
 
