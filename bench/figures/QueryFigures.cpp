@@ -1,4 +1,6 @@
 // What it takes to ask a full store: a range of time, a session, and a name that is rare.
+#include <sqlite3.h>
+
 #include <atomic>
 #include <cstdint>
 #include <string>
@@ -8,6 +10,8 @@
 #include "bench/figures/Figures.h"
 #include "host/machine/LinuxClock.h"
 #include "recorder/Recorder.h"
+#include "recorder/store/Connection.h"
+#include "recorder/store/Statement.h"
 #include "recorder/store/reading/EventReader.h"
 #include "testing/RecordingLog.h"
 
@@ -68,6 +72,24 @@ class FullStore {
     }
     return nowSeconds() - start;
   }
+  // The same of a question to the view that people ask, by SQLite alone.
+  double askPlainly(const std::string& where) const {
+    const double start = nowSeconds();
+    recorder::Connection connection;
+    recorder::Statement rows;
+    if (connection.open(file_, SQLITE_OPEN_READONLY) != SQLITE_OK ||
+        rows.prepare(connection.handle(), "SELECT * FROM events WHERE " + where + " ORDER BY id") != SQLITE_OK) {
+      fail(connection.errorText());
+    }
+    std::size_t found = 0;
+    while (rows.step() == SQLITE_ROW) {
+      ++found;
+    }
+    if (found == 0) {
+      fail("a plain query found nothing");
+    }
+    return nowSeconds() - start;
+  }
   double middle() const { return latest_ / 2; }
   std::int64_t middleSession() const { return session / 2; }
 
@@ -110,6 +132,23 @@ void measureQueries(const Settings& settings, Table& table) {
   recorder::EventQuery ofName;
   ofName.nameGlob = "*.tarnkit.Rare";
   measure("a full store asked for a rare name", ofName);
+  const auto measurePlain = [&](const char* what, const std::string& where, bool isJudged) {
+    Samples samples;
+    for (int round = 0; round < settings.rounds; ++round) {
+      samples.push_back(store.askPlainly(where));
+    }
+    const double took = median(samples);
+    if (isJudged) {
+      table.addWithTarget({what, milliseconds(took), "", "", "<= 20 ms", {}}, took, kTarget);
+    } else {
+      table.add({what, milliseconds(took), "", "", "", {}});
+    }
+  };
+  measurePlain("  in SQL alone: a session", "session = " + std::to_string(store.middleSession()), true);
+  measurePlain("  in SQL alone: a rare name", "name = 'sys.oxbow.tarnkit.Rare'", true);
+  measurePlain("  in SQL alone: two minutes, gone through",
+               "time >= " + std::to_string(store.middle()) + " AND time < " + std::to_string(store.middle() + kAsked),
+               false);
 }
 
 }  // namespace tarn::bench

@@ -125,18 +125,17 @@ int EventTable::placePayload(std::int64_t id, const StoredEvent& event, bool rep
 }
 
 int EventTable::noteSession(std::int64_t id, std::int64_t session) {
-  if (session == lastSession_ && id - lastSpan_ < kReach) return SQLITE_OK;
+  const std::int64_t first = id & -kReach;
+  if (session == lastSession_ && first == lastSpan_) return SQLITE_OK;
   if (spans_.size() >= kMostSpans) {
     spans_.clear();
   }
-  const auto [span, isNew] = spans_.try_emplace(session, id);
-  const bool begins = isNew || id - span->second >= kReach;
-  if (begins) {
-    span->second = id;
-  }
+  const auto [span, isNew] = spans_.try_emplace(session, first);
+  const bool begins = isNew || span->second != first;
+  span->second = first;
   lastSession_ = session;
-  lastSpan_ = span->second;
-  return begins ? insertSpan_.bind(1, session).bind(2, id).run() : SQLITE_OK;
+  lastSpan_ = first;
+  return begins ? insertSpan_.bind(1, session).bind(2, first).run() : SQLITE_OK;
 }
 
 // A block's times are written when the next one begins; until then, and where a rollback or another run left it

@@ -3,8 +3,8 @@
 //   event_rows(id, time, kind, payload, cut, session)
 //   event_texts(id, backend, name, text)     2 * id:      the payload of the event `id`
 //                                            2 * id + 1:  a kind of event, as the event `id` was the first to have it
-//   session_spans(session, first)            the session has events from `first` on, within kReach ids
-//   event_times(block, earliest, latest)     of the events whose id, divided by 1024, is `block`
+//   session_spans(session, first)            the session has events among the kReach ids from `first` on, a multiple of
+//   it event_times(block, earliest, latest)     of the events whose id, divided by 1024, is `block`
 //
 // Which problem: a message becomes two analytics events and a mirror's, with one payload, and names that repeat
 // endlessly; stored as they are they take twice the room and twice the writing. How: a row names its kind (back-end,
@@ -13,7 +13,8 @@
 //
 // A row only looks back so far, however many events there are: the writer needs no look-up in the database, what isn't
 // needed any more is found by its id alone, and damage reaches no further. As kinds and spans are written anew after
-// that, they also tell where to look for a name or a session; so there is no index of rows.
+// that, they also tell where to look for a name or a session; so there is no index of rows. A row lies in one span of
+// its session, which the view `events` joins with it.
 //
 // Owner: the event file. Threads: the writer's. What fails answers SQLite's code.
 #pragma once
@@ -32,7 +33,7 @@ namespace tarn::recorder {
 
 class EventTable {
  public:
-  // How far back a row's kind may lie, and its session's span; and how far its payload.
+  // How far back a row's kind may lie, and its session's span (a power of two); and how far its payload.
   static constexpr std::int64_t kReach = 256;
   static constexpr std::int64_t kPayloadReach = 2048;
   // Ids of a block, as a power of two.

@@ -25,7 +25,7 @@ bool isAsWritten(const Statement& row) noexcept {
 Status StoreCheck::begin() {
   finalize();
   next_ = 0;
-  good_ = 0;
+  good_ = stray_ = 0;
   stridesLeft_ = kMostStrides;
   unproven_.clear();
   lost_.clear();
@@ -38,6 +38,12 @@ Status StoreCheck::begin() {
     code = rows_.prepare(connection_.handle(), rows + " WHERE r.id >= ?1 AND r.id < ?2 ORDER BY r.id");
   }
   removedIds_.prepare(connection_);
+  if (code == SQLITE_OK && !selectEvents(connection_).isOlder) {
+    code = strays_.prepare(connection_.handle(),
+                           "SELECT r.id FROM event_rows AS r WHERE r.id >= ?1 AND r.id < ?2 AND r.session IS NOT NULL "
+                           "AND NOT EXISTS (SELECT 1 FROM session_spans AS s WHERE s.session = r.session AND s.first = "
+                           "(r.id & -256)) LIMIT 1");
+  }
   done_ = code != SQLITE_OK;
   return connection_.errorOf(code);
 }
@@ -46,6 +52,7 @@ void StoreCheck::finalize() noexcept {
   groups_.finalize();
   rows_.finalize();
   removedIds_.finalize();
+  strays_.finalize();
   done_ = true;
 }
 
@@ -81,7 +88,24 @@ Status StoreCheck::lookAtGroup() {
   }
   if (auto error = lookAtRows(std::max(next_, group_.first()), group_.end(), &group_); error.failed()) return error;
   next_ = group_.end();
-  return {};
+  return lookForStrays();
+}
+
+// An event that its session's spans don't lead to is there, but nobody who asks for the session finds it.
+Status StoreCheck::lookForStrays() {
+  if (strays_.handle() == nullptr) return {};
+  const int code = strays_.bind(1, group_.first()).bind(2, group_.end()).step();
+  const std::int64_t stray = code == SQLITE_ROW ? strays_.integer(0) : 0;
+  strays_.reset();
+  if (code == SQLITE_DONE || (code != SQLITE_ROW && tolerant_)) return {};
+  if (code != SQLITE_ROW) return connection_.errorOf(code);
+  stray_ = stray_ == 0 ? stray : stray_;
+  return tolerant_ ? Status() : Error{SQLITE_CORRUPT, strayText()};
+}
+
+std::string StoreCheck::strayText() const {
+  return stray_ == 0 ? std::string()
+                     : "damaged: the spans of its session don't lead to event " + std::to_string(stray_);
 }
 
 // Without a group nothing proves the rows.

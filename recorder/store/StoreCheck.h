@@ -45,6 +45,8 @@ class StoreCheck {
   const std::vector<IdRange>& unproven() const noexcept { return unproven_; }
   const std::vector<IdRange>& lost() const noexcept { return lost_; }
   const std::vector<IdRange>& knownLost() const noexcept { return knownLost_; }
+  // The first event that its session doesn't lead to, in words; empty for none.
+  std::string strayText() const;
 
  private:
   // What the recorder has noted as lost, in rising order.
@@ -55,6 +57,8 @@ class StoreCheck {
   [[nodiscard]] Status lookAtRows(std::int64_t first, std::int64_t end, const EventGroup* group);
   // As it was written, unproven or lost.
   void lookAtRow(std::int64_t id, const EventGroup* group);
+  // Whether the events of the group are found by their sessions.
+  [[nodiscard]] Status lookForStrays();
   // The ids after the last group, up to the last that was given.
   [[nodiscard]] Status finish();
   // These aren't there: lost, but for those that retention removed.
@@ -68,6 +72,7 @@ class StoreCheck {
   Statement rows_;
   RemovedIds removedIds_;
   std::vector<IdRange> removed_;  // of a gap that is looked at
+  Statement strays_;
   // That is looked at.
   EventGroup group_;
   // Where goOn() goes on. Every id from the file's first up to here was looked at.
@@ -77,6 +82,7 @@ class StoreCheck {
   // Bounds what is passed over of a file whose last id is damage.
   int stridesLeft_ = 0;
   std::int64_t good_ = 0;
+  std::int64_t stray_ = 0;
   std::vector<IdRange> unproven_;
   std::vector<IdRange> lost_;
   std::vector<IdRange> knownLost_;

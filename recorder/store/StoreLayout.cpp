@@ -165,9 +165,18 @@ Status checkCurrentTables(Connection& connection, std::string& missing) {
 Status completeTables(Connection& connection) {
   std::string missing;
   const Status error = checkCurrentTables(connection, missing);
-  if (error.failed() || missing.empty()) return error;
-  // What rows without a checksum say now is all that is known of them.
-  return makeAtOnce(connection, missing + SessionSums::sealAll());
+  if (error.failed()) return error;
+  if (!missing.empty()) {
+    // What rows without a checksum say now is all that is known of them.
+    if (Status made = makeAtOnce(connection, missing + SessionSums::sealAll()); made.failed()) return made;
+  }
+  // Spans began with any event once, and could lie across each other.
+  const Result<std::int64_t> others =
+      connection.readInteger("SELECT EXISTS (SELECT 1 FROM session_spans WHERE first & 255 <> 0)");
+  if (others.failed() || others.value == 0) return others.error;
+  return makeAtOnce(connection,
+                    "DELETE FROM session_spans; INSERT INTO session_spans SELECT DISTINCT session, id & -256 FROM "
+                    "event_rows WHERE session IS NOT NULL;");
 }
 
 // What is right needs no transaction.

@@ -68,6 +68,9 @@ Result<StoreReport> inspectStore(const std::filesystem::path& file) {
   report.notedLost = check.knownLost();
   report.unproven = check.unproven();
   check.finalize();
+  if (report.damage.empty()) {
+    report.damage = check.strayText();
+  }
   SessionCheck sessions(connection);
   Status rows = sessions.begin();
   for (Status failed; !sessions.isDone();) {

@@ -99,46 +99,43 @@ constexpr Columns kSummaryKeys = {
     {"load_1_min", "load_avg_1_min"},
 };
 
-// A session's rows are found from its spans; where two of them overlap, a row is the later one's.
-constexpr const char* kBySession =
-    " FROM session_spans AS s CROSS JOIN event_rows AS r ON r.id BETWEEN s.first AND s.first + 255 AND r.session = "
-    "s.session AND NOT EXISTS (SELECT 1 FROM session_spans AS t WHERE t.session = s.session AND t.first > s.first AND "
-    "t.first <= r.id)";
-constexpr const char* kByName =
-    " FROM event_texts AS k CROSS JOIN event_rows AS r ON k.name IS NOT NULL AND r.id BETWEEN k.id >> 1 AND "
-    "(k.id >> 1) + 255 AND r.kind = r.id - (k.id >> 1)";
-
-// The columns of `events`, its rows found in another way.
-std::string eventsBy(const std::string& view, const char* rows, const char* session, bool hasKinds) {
+// The rows of `events`, in whichever way is quick: SQLite begins with the kinds where the name is asked for, with a
+// session's spans where the session is, and else with the rows. Each join says twice where the other lies, so that it
+// can be gone both ways; how likely that is, is about the share of a span in a large file, which SQLite can't know. The
+// session is that of the span: an event of nobody's has none.
+std::string allEvents() {
   const std::string select(kSelectEvents);
-  std::string sql = "CREATE VIEW " + view + " AS " + select.substr(0, select.find(" FROM event_rows"));
-  sql.replace(sql.find("r.session AS session"), 9, session);
-  sql += rows;
-  sql += hasKinds ? "" : " CROSS JOIN event_texts AS k ON k.id = 2 * (r.id - r.kind) + 1";
-  return sql + select.substr(select.find(" LEFT JOIN"));
+  std::string sql = select.substr(0, select.find(" CROSS JOIN"));
+  sql.replace(sql.find("r.session AS session"), 9, "s.session");
+  return sql +
+         " JOIN event_texts AS k ON k.id = 2 * (r.id - r.kind) + 1 AND r.id BETWEEN k.id >> 1 AND (k.id >> 1) + 255 "
+         "LEFT JOIN session_spans AS s ON s.session = r.session AND s.first = (r.id & -256) AND "
+         "likelihood(r.id >= s.first, 0.003) AND likelihood(r.id <= s.first + 255, 0.003)" +
+         select.substr(select.find(" LEFT JOIN"));
 }
 
 std::vector<std::pair<std::string_view, std::string>> makeViews() {
   std::vector<std::pair<std::string_view, std::string>> views;
-  views.emplace_back("events", "CREATE VIEW events AS " + std::string(kSelectEvents));
-  views.emplace_back("v_events_by_session", eventsBy("v_events_by_session", kBySession, "s.session", false));
-  views.emplace_back("v_events_by_name", eventsBy("v_events_by_name", kByName, "r.session", true));
-  const std::string messages = "SELECT id, time, session" + keysOf("payload", kMessageKeys) +
-                               ", payload FROM events WHERE backend = 'tally' AND name GLOB 'sys.oxbow.tarnkit.*' AND "
-                               "payload ->> '$.audiotag' IS NOT NULL";
+  views.emplace_back("events", "CREATE VIEW events AS " + allEvents());
+  // Nearly every name is one of these, so the kinds don't tell where to look.
+  const std::string messages =
+      "SELECT id, time, session" + keysOf("payload", kMessageKeys) +
+      ", payload FROM events WHERE +backend = 'tally' AND +name GLOB 'sys.oxbow.tarnkit.*' AND "
+      "payload ->> '$.audiotag' IS NOT NULL";
   views.emplace_back("v_messages", "CREATE VIEW v_messages AS " + messages);
   views.emplace_back("v_volume", derivedView("v_volume", "Volume.Summary", kVolumeKeys));
   views.emplace_back("v_input", derivedView("v_input", "Input.Summary", kInputKeys));
   views.emplace_back("v_group", derivedView("v_group", "Lagoon.Summary", kGroupKeys));
   views.emplace_back("v_summaries", derivedView("v_summaries", "Session_Generic.Summary", kSummaryKeys));
   // Most messages have none, which the text tells without being read as JSON.
-  views.emplace_back("v_issues",
-                     "CREATE VIEW v_issues AS SELECT id, time, session, payload ->> '$.audiotag' AS audiotag, payload "
-                     "->> '$.HostApplicationDisplayID' AS application, payload ->> '$.issue_type' AS issue_type, "
-                     "payload ->> '$.node' AS node, payload ->> '$.rtaid_client' AS rtaid_client, payload ->> "
-                     "'$.any_channel_silence_seconds' AS silence_seconds FROM events WHERE backend = 'tally' AND name "
-                     "GLOB 'sys.oxbow.tarnkit.*' AND instr(payload, '\"issue_type\":') > 0 AND payload ->> "
-                     "'$.issue_type' IS NOT NULL");
+  views.emplace_back(
+      "v_issues",
+      "CREATE VIEW v_issues AS SELECT id, time, session, payload ->> '$.audiotag' AS audiotag, payload "
+      "->> '$.HostApplicationDisplayID' AS application, payload ->> '$.issue_type' AS issue_type, "
+      "payload ->> '$.node' AS node, payload ->> '$.rtaid_client' AS rtaid_client, payload ->> "
+      "'$.any_channel_silence_seconds' AS silence_seconds FROM events WHERE +backend = 'tally' AND +name "
+      "GLOB 'sys.oxbow.tarnkit.*' AND instr(payload, '\"issue_type\":') > 0 AND payload ->> "
+      "'$.issue_type' IS NOT NULL");
   views.emplace_back("v_drivers",
                      std::string("CREATE VIEW v_drivers AS SELECT r.id AS id, r.time AS time, r.session AS session, "
                                  "lower(substr(k.name, 25)) AS kind, c.key AS channel, c.value AS value FROM "

@@ -14,7 +14,8 @@ struct Made {
   std::string_view sql;
 };
 
-// One row an event, with the columns of `events`. The event's own row is `r`, its kind `k`.
+// One row an event, with the columns of `events`, for a file of which nothing is trusted but the rows themselves. The
+// event's own row is `r`, its kind `k`.
 constexpr std::string_view kSelectEvents =
     // Rows go ahead: nothing finds the rows of a kind but going through them.
     "SELECT r.id AS id, r.time AS time, k.backend AS backend, k.name AS name, CASE WHEN r.payload IS NULL THEN '{}' "

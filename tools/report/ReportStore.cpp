@@ -155,8 +155,15 @@ Status ReportStore::countedEvents(const TimeRange& range, const std::function<vo
 
 Result<std::map<std::int64_t, std::vector<EventRow>>> ReportStore::eventsOf(const std::vector<std::int64_t>& ids) {
   Result<std::map<std::int64_t, std::vector<EventRow>>> read;
+  if (ids.empty()) return read;
+  std::string wanted;
+  for (const std::int64_t id : ids) {
+    wanted += (wanted.empty() ? "(" : ", (") + std::to_string(id) + ")";
+  }
+  // One session after the other, each of which is quick; a list of them would be looked for among all events.
   const std::string sql = "SELECT id, session, time, backend, name, CASE WHEN " + std::string(kIsMessage) +
-                          " THEN payload END FROM events WHERE session IN " + listOf(ids) + " ORDER BY id";
+                          " THEN payload END FROM (VALUES " + wanted +
+                          ") AS w JOIN events ON session = w.column1 ORDER BY id";
   read.error = each(sql, {}, [&](const recorder::Statement& row) {
     read.value[row.integer(1)].push_back({row.integer(0), row.integer(1), row.real(2), std::string(row.text(3)),
                                           std::string(row.text(4)), std::string(row.text(5))});

@@ -1,4 +1,8 @@
 // The views by which people read the store, on a stream as the service hands it over.
+#include <algorithm>
+
+#include "recorder/store/StoreReport.h"
+#include "recorder/store/StoreViews.h"
 #include "tests/recorder/store/RecordsFixture.h"
 
 namespace tarn::recorder {
@@ -15,7 +19,7 @@ class StoreViews : public RecordsFixture {
     recorder_->record("rtc", "sendMessage", payload, {{"session", 1}, {"category", 1}, {"type", 1}}, 5);
   }
   Rows rows(const std::string& columns, const std::string& view) {
-    EXPECT_TRUE(flush());
+    EXPECT_TRUE(!recorder_ || flush());
     return ask(file(), "SELECT " + columns + " FROM " + view);
   }
 };
@@ -77,26 +81,88 @@ TEST_F(StoreViews, DriverCountersAreOneRowAChannel) {
       (Rows{"1|simple|Amp_Haptics_Simple_drops|1", "1|simple|Amp_Simple_hits|3", "4|state|Amp_State_power|name:on"}));
 }
 
-TEST_F(StoreViews, EventsBySessionAndByNameAreTheEvents) {
-  start();
-  for (int i = 0; i < 2000; ++i) {
-    workFor(i % 3);
-    record("event" + std::to_string(i % 5), {{"n", i}});
-    if (i % 250 == 0) {
-      ASSERT_TRUE(flush());
+class StoreOfManySessions : public StoreViews {
+ protected:
+  // Events of three sessions and of nobody by turns, in many commits and two runs, so that spans and kinds begin anew.
+  void fill() {
+    start();
+    for (int i = 0; i < 2000; ++i) {
+      workFor(i % 4);
+      record("event" + std::to_string(i % 5), {{"n", i}});
+      if (i % 250 == 0) {
+        ASSERT_TRUE(flush());
+      }
+      if (i == 1000) {
+        stop();
+        start();
+      }
     }
-    if (i == 1000) {  // spans and kinds begin anew
-      stop();
-      start();
-    }
+    workFor(0);
+    ASSERT_TRUE(flush());
   }
-  workFor(0);
-  const std::string ofSession = " WHERE session = 2 ORDER BY id";
-  EXPECT_EQ(rows("*", "v_events_by_session" + ofSession), rows("*", "events" + ofSession));
-  EXPECT_EQ(rows("count(*)", "v_events_by_session"), rows("count(session)", "events"));
-  const std::string ofName = " WHERE name = 'event3' ORDER BY id";
-  EXPECT_EQ(rows("*", "v_events_by_name" + ofName), rows("*", "events" + ofName));
-  EXPECT_EQ(rows("count(*)", "v_events_by_name"), Rows{"2000"});
+  // As its rows alone tell it.
+  Rows fromRows(const std::string& where) {
+    return ask(file(), "SELECT * FROM (" + std::string(kSelectEvents) + ") " + where + " ORDER BY id");
+  }
+  // Whether no table is gone through as a whole.
+  bool isLookedUp(const std::string& question) {
+    const Rows plan = ask(file(), "EXPLAIN QUERY PLAN " + question);
+    EXPECT_FALSE(plan.empty());
+    return std::none_of(plan.begin(), plan.end(),
+                        [](const std::string& step) { return step.find("SCAN") != std::string::npos; });
+  }
+};
+
+TEST_F(StoreOfManySessions, EventsAreTheRowsHoweverTheyAreAskedFor) {
+  fill();
+  EXPECT_EQ(rows("count(*), count(session), min(id), max(id)", "events"), Rows{"2000|1500|1|2000"});
+  for (const char* const where :
+       {"WHERE 1", "WHERE session = 2", "WHERE session = 9", "WHERE session IS NULL", "WHERE session BETWEEN 1 AND 2",
+        "WHERE session IN (1, 3)", "WHERE name = 'event3'", "WHERE name GLOB 'event[12]'", "WHERE name = 'none'",
+        "WHERE session = 3 AND name = 'event3'", "WHERE session = 1 AND id > 1200 AND id <= 1300",
+        "WHERE name = 'event0' AND id > 1900", "WHERE id = 700"}) {
+    EXPECT_EQ(rows("*", "events " + std::string(where) + " ORDER BY id"), fromRows(where)) << where;
+  }
+}
+
+TEST_F(StoreOfManySessions, SessionsAndNamesAreLookedUp) {
+  fill();
+  for (const char* const question :
+       {"SELECT * FROM events WHERE session = 2", "SELECT * FROM events WHERE session = 2 ORDER BY id",
+        "SELECT name, count(*) FROM events WHERE session = 2 GROUP BY name",
+        "SELECT * FROM events WHERE name = 'event3'", "SELECT * FROM events WHERE name = 'event3' ORDER BY id",
+        "SELECT * FROM events WHERE session = 2 AND name = 'event3' ORDER BY id DESC LIMIT 1",
+        "SELECT * FROM v_messages WHERE session = 2", "SELECT * FROM events WHERE id > 5 ORDER BY id LIMIT 10"}) {
+    EXPECT_TRUE(isLookedUp(question)) << question;
+  }
+  EXPECT_FALSE(isLookedUp("SELECT * FROM events WHERE time > 5")) << "that is gone through";
+}
+
+TEST_F(StoreOfManySessions, SpansThatBeganAnywhereAreBroughtInOrder) {
+  fill();
+  stop();
+  const Rows before = fromRows("WHERE session = 2");
+  change(file(), "UPDATE session_spans SET first = first + 3");
+  EXPECT_NE(rows("*", "events WHERE session = 2 ORDER BY id"), before);
+  start().waitUntilOpened();
+  EXPECT_EQ(rows("*", "events WHERE session = 2 ORDER BY id"), before);
+  EXPECT_EQ(errors(), 0U);
+}
+
+TEST_F(StoreOfManySessions, ALostSpanIsTold) {
+  fill();
+  stop();
+  EXPECT_TRUE(inspectStore(file()).value.isWhole());
+  change(file(), "DELETE FROM session_spans WHERE session = 2 AND first = 512");
+  EXPECT_EQ(inspectStore(file()).value.damage, "damaged: the spans of its session don't lead to event 515");
+  EXPECT_TRUE(inspectStore(file()).value.lost.empty());
+  options_.verifyInterval = options_.verifyRest = std::chrono::milliseconds(1);
+  start();
+  ASSERT_TRUE(eventually([&] { return log_.count("got 2000 events from recorder.sqlite3.damaged-") == 1; }));
+  ASSERT_TRUE(flush());
+  stop();
+  EXPECT_EQ(rows("count(*)", "events WHERE session = 2"), Rows{"500"});
+  EXPECT_TRUE(inspectStore(file()).value.isWhole());
 }
 
 }  // namespace
