@@ -8,7 +8,7 @@
 
 #include "platform/Clock.h"
 #include "platform/SessionRecords.h"
-#include "recorder/store/sessions/SessionTable.h"
+#include "recorder/store/SessionTable.h"
 
 namespace tarn::recorder {
 

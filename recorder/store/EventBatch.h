@@ -11,7 +11,7 @@
 #include <vector>
 
 #include "plist/Dictionary.h"
-#include "recorder/store/sessions/SessionTable.h"
+#include "recorder/store/SessionTable.h"
 
 namespace tarn::recorder {
 

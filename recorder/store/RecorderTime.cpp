@@ -6,7 +6,7 @@
 #include <cmath>
 #include <fstream>
 
-#include "recorder/store/Statement.h"
+#include "recorder/store/rows/Statement.h"
 #include "recorder/store/files/RowHash.h"
 
 namespace tarn::recorder {

@@ -7,7 +7,7 @@
 #include <string>
 #include <utility>
 
-#include "recorder/store/sessions/SessionSums.h"
+#include "recorder/store/SessionSums.h"
 
 namespace tarn::recorder {
 

@@ -25,8 +25,8 @@
 #include <vector>
 
 #include "plist/ThreadSafety.h"
-#include "recorder/store/Connection.h"
-#include "recorder/store/Statement.h"
+#include "recorder/store/rows/Connection.h"
+#include "recorder/store/rows/Statement.h"
 #include "recorder/store/retention/EventOwner.h"
 #include "recorder/store/retention/EventRemoval.h"
 #include "recorder/store/retention/EventScan.h"

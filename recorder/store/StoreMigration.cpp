@@ -5,8 +5,8 @@
 #include <limits>
 #include <string>
 
-#include "recorder/store/EventTable.h"
-#include "recorder/store/Statement.h"
+#include "recorder/store/rows/EventTable.h"
+#include "recorder/store/rows/Statement.h"
 #include "recorder/store/StoreLayout.h"
 
 namespace tarn::recorder {

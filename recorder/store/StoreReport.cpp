@@ -4,7 +4,7 @@
 
 #include <system_error>
 
-#include "recorder/store/Connection.h"
+#include "recorder/store/rows/Connection.h"
 #include "recorder/store/StoreLayout.h"
 #include "recorder/store/files/Remedy.h"
 

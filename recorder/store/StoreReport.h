@@ -9,7 +9,7 @@
 
 #include "plist/Result.h"
 #include "recorder/store/StoreCheck.h"
-#include "recorder/store/sessions/SessionCheck.h"
+#include "recorder/store/SessionCheck.h"
 
 namespace tarn::recorder {
 

@@ -10,8 +10,8 @@
 #include <string>
 
 #include "plist/Result.h"
-#include "recorder/store/Connection.h"
-#include "recorder/store/Statement.h"
+#include "recorder/store/rows/Connection.h"
+#include "recorder/store/rows/Statement.h"
 #include "recorder/store/reading/StoreAccess.h"
 
 namespace tarn::report {

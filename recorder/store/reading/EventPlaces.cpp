@@ -8,7 +8,7 @@
 #include <string_view>
 #include <utility>
 
-#include "recorder/store/EventTable.h"
+#include "recorder/store/rows/EventTable.h"
 #include "recorder/store/GlobPattern.h"
 #include "recorder/store/reading/EventReader.h"
 

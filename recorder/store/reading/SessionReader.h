@@ -20,8 +20,8 @@
 #include <vector>
 
 #include "plist/Result.h"
-#include "recorder/store/Connection.h"
-#include "recorder/store/Statement.h"
+#include "recorder/store/rows/Connection.h"
+#include "recorder/store/rows/Statement.h"
 #include "recorder/store/reading/EventReader.h"
 #include "recorder/store/reading/StoreAccess.h"
 

@@ -13,9 +13,9 @@
 #include <string>
 #include <vector>
 
-#include "recorder/store/Connection.h"
-#include "recorder/store/EventGroup.h"
-#include "recorder/store/Statement.h"
+#include "recorder/store/rows/Connection.h"
+#include "recorder/store/rows/EventGroup.h"
+#include "recorder/store/rows/Statement.h"
 #include "recorder/store/retention/RemovedIds.h"
 
 namespace tarn::recorder {

@@ -9,8 +9,8 @@
 #include <unordered_map>
 #include <vector>
 
-#include "recorder/store/Connection.h"
-#include "recorder/store/Statement.h"
+#include "recorder/store/rows/Connection.h"
+#include "recorder/store/rows/Statement.h"
 #include "recorder/store/retention/EventOwner.h"
 
 namespace tarn::recorder {

@@ -4,7 +4,7 @@
 
 #include <string_view>
 
-#include "recorder/store/Statement.h"
+#include "recorder/store/rows/Statement.h"
 
 namespace tarn::recorder {
 

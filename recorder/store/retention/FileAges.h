@@ -13,7 +13,7 @@
 #include <set>
 #include <string>
 
-#include "recorder/store/Connection.h"
+#include "recorder/store/rows/Connection.h"
 
 namespace tarn::recorder {
 

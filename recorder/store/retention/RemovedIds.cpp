@@ -5,7 +5,7 @@
 #include <algorithm>
 #include <string>
 
-#include "recorder/store/EventTable.h"
+#include "recorder/store/rows/EventTable.h"
 #include "recorder/store/files/RowHash.h"
 
 namespace tarn::recorder {

@@ -12,8 +12,8 @@
 #include <cstdint>
 #include <vector>
 
-#include "recorder/store/Connection.h"
-#include "recorder/store/Statement.h"
+#include "recorder/store/rows/Connection.h"
+#include "recorder/store/rows/Statement.h"
 #include "recorder/store/retention/IdRange.h"
 
 namespace tarn::recorder {

@@ -1,11 +1,11 @@
-#include "recorder/store/sessions/SessionTable.h"
+#include "recorder/store/SessionTable.h"
 
 #include <sqlite3.h>
 
 #include <algorithm>
 #include <new>
 
-#include "recorder/store/EventTable.h"
+#include "recorder/store/rows/EventTable.h"
 
 namespace tarn::recorder {
 

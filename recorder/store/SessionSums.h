@@ -15,8 +15,8 @@
 #include <string>
 #include <string_view>
 
-#include "recorder/store/Connection.h"
-#include "recorder/store/Statement.h"
+#include "recorder/store/rows/Connection.h"
+#include "recorder/store/rows/Statement.h"
 
 namespace tarn::recorder {
 

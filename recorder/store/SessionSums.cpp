@@ -1,4 +1,4 @@
-#include "recorder/store/sessions/SessionSums.h"
+#include "recorder/store/SessionSums.h"
 
 #include <sqlite3.h>
 

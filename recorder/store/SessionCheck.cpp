@@ -1,4 +1,4 @@
-#include "recorder/store/sessions/SessionCheck.h"
+#include "recorder/store/SessionCheck.h"
 
 #include <sqlite3.h>
 
