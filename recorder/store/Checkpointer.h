@@ -13,7 +13,7 @@
 #include <thread>
 
 #include "plist/ThreadSafety.h"
-#include "recorder/store/Connection.h"
+#include "recorder/store/rows/Connection.h"
 
 namespace tarn::recorder {
 

@@ -15,7 +15,7 @@
 
 #include "platform/Clock.h"
 #include "plist/Result.h"
-#include "recorder/store/Connection.h"
+#include "recorder/store/rows/Connection.h"
 
 namespace tarn::recorder {
 

@@ -22,12 +22,12 @@
 #include <vector>
 
 #include "plist/ThreadSafety.h"
-#include "recorder/store/Connection.h"
-#include "recorder/store/Statement.h"
 #include "recorder/store/retention/EventOwner.h"
 #include "recorder/store/retention/EventRemoval.h"
 #include "recorder/store/retention/EventScan.h"
 #include "recorder/store/retention/Shares.h"
+#include "recorder/store/rows/Connection.h"
+#include "recorder/store/rows/Statement.h"
 
 namespace tarn::recorder {
 

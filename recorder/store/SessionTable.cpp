@@ -5,7 +5,7 @@
 #include <algorithm>
 #include <new>
 
-#include "recorder/store/EventTable.h"
+#include "recorder/store/rows/EventTable.h"
 
 namespace tarn::recorder {
 

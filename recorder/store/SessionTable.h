@@ -18,8 +18,8 @@
 #include <vector>
 
 #include "platform/SessionRecords.h"
-#include "recorder/store/Connection.h"
-#include "recorder/store/Statement.h"
+#include "recorder/store/rows/Connection.h"
+#include "recorder/store/rows/Statement.h"
 
 namespace tarn::recorder {
 

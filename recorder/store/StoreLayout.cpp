@@ -7,8 +7,8 @@
 #include <string>
 #include <string_view>
 
-#include "recorder/store/Statement.h"
 #include "recorder/store/StoreViews.h"
+#include "recorder/store/rows/Statement.h"
 
 namespace tarn::recorder {
 

@@ -11,7 +11,7 @@
 #include <string_view>
 
 #include "plist/Result.h"
-#include "recorder/store/Connection.h"
+#include "recorder/store/rows/Connection.h"
 
 namespace tarn::recorder {
 

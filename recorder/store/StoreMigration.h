@@ -4,7 +4,7 @@
 #include <cstdint>
 
 #include "plist/Result.h"
-#include "recorder/store/Connection.h"
+#include "recorder/store/rows/Connection.h"
 
 namespace tarn::recorder {
 

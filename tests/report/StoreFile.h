@@ -7,7 +7,7 @@
 #include <filesystem>
 #include <string>
 
-#include "recorder/store/Connection.h"
+#include "recorder/store/rows/Connection.h"
 #include "tests/host/TemporaryFolder.h"
 
 namespace tarn::testing {

@@ -19,7 +19,8 @@ GROUND = BASE + ("host/system", "host/log")
 HOST = ("host/system", "host/log", "host/loop", "host/socket", "host/settings", "host/machine", "host/drivers",
         "host/ring", "host/traces", "host/traces/analysis")
 # The recorder's database, and what lies beside it.
-STORE = ("recorder/store", "recorder/store/files", "recorder/store/reading", "recorder/store/retention")
+STORE = ("recorder/store", "recorder/store/files", "recorder/store/rows", "recorder/store/reading",
+         "recorder/store/retention")
 PROGRAM = SESSION + WORKERS + ("service", "wire", "recorder") + STORE + HOST + ("host",)
 
 # Each folder, from the ground up, and what its files may include beside files of its own. The worker families don't
@@ -44,10 +45,12 @@ ROOMS = {
     **{folder: SESSION for folder in WORKERS},
     "service": SESSION + WORKERS,
     "recorder/store/files": BASE,
-    "recorder/store": BASE + ("recorder/store/files", "recorder/store/retention"),
-    # How the store forgets is a part of it, in a folder of its own.
-    "recorder/store/retention": BASE + ("recorder/store/files", "recorder/store"),
-    "recorder/store/reading": BASE + ("recorder/store/files", "recorder/store", "recorder/store/retention"),
+    "recorder/store/rows": BASE + ("recorder/store/files",),
+    # How the store forgets.
+    "recorder/store/retention": BASE + ("recorder/store/files", "recorder/store/rows"),
+    "recorder/store": BASE + ("recorder/store/files", "recorder/store/rows", "recorder/store/retention"),
+    "recorder/store/reading": BASE + ("recorder/store/files", "recorder/store/rows", "recorder/store/retention",
+                                      "recorder/store"),
     "recorder": BASE + ("service/vocabulary",) + STORE,
     "host/system": BASE,
     "host/log": BASE + ("host/system",),
@@ -76,7 +79,7 @@ ROOMS = {
     "tools/ctl/views": PROGRAM + ("client", "tools/ctl", "tools/ctl/terminal", "tools/report"),
     "tools/manual": PROGRAM + ("tools/ctl",),
     # What checks the service shares no code with it, but for the client and the reader of the recorder's file.
-    "tests/scenario": VALUES + ("client", "wire", "recorder/store", "recorder/store/reading"),
+    "tests/scenario": VALUES + ("client", "wire", "recorder/store/rows", "recorder/store", "recorder/store/reading"),
 }
 # Folders, with all below them, whose files may look at everything.
 TRIALS = ("tests", "bench", "fuzz", "examples")

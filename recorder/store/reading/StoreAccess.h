@@ -9,7 +9,7 @@
 #include <string>
 
 #include "plist/Result.h"
-#include "recorder/store/Connection.h"
+#include "recorder/store/rows/Connection.h"
 
 namespace tarn::recorder {
 

@@ -8,7 +8,7 @@
 #include <cstdint>
 #include <string_view>
 
-#include "recorder/store/EventGroup.h"
+#include "recorder/store/rows/EventGroup.h"
 
 namespace tarn::recorder {
 

@@ -8,7 +8,7 @@
 #include <unordered_map>
 #include <utility>
 
-#include "recorder/store/EventTable.h"
+#include "recorder/store/rows/EventTable.h"
 
 namespace tarn::recorder {
 

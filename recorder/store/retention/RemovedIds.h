@@ -12,9 +12,9 @@
 #include <cstdint>
 #include <vector>
 
-#include "recorder/store/Connection.h"
-#include "recorder/store/Statement.h"
 #include "recorder/store/retention/IdRange.h"
+#include "recorder/store/rows/Connection.h"
+#include "recorder/store/rows/Statement.h"
 
 namespace tarn::recorder {
 

@@ -1,5 +1,5 @@
 // How events share their texts, and that nobody sees it.
-#include "recorder/store/EventTable.h"
+#include "recorder/store/rows/EventTable.h"
 
 #include "recorder/store/StoreReport.h"
 #include "recorder/store/reading/EventReader.h"

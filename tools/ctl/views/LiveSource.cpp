@@ -3,7 +3,7 @@
 #include <chrono>
 #include <utility>
 
-#include "recorder/store/Statement.h"
+#include "recorder/store/rows/Statement.h"
 #include "tools/report/Message.h"
 
 namespace tarn::ctl {

@@ -1,4 +1,4 @@
-#include "recorder/store/Statement.h"
+#include "recorder/store/rows/Statement.h"
 
 #include <sqlite3.h>
 

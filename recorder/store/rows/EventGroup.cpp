@@ -1,4 +1,4 @@
-#include "recorder/store/EventGroup.h"
+#include "recorder/store/rows/EventGroup.h"
 
 #include "recorder/store/files/RowHash.h"
 

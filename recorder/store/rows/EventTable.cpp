@@ -1,4 +1,4 @@
-#include "recorder/store/EventTable.h"
+#include "recorder/store/rows/EventTable.h"
 
 #include <sqlite3.h>
 

@@ -1,4 +1,4 @@
-#include "recorder/store/Connection.h"
+#include "recorder/store/rows/Connection.h"
 
 #include <sqlite3.h>
 
@@ -6,7 +6,7 @@
 #include <utility>
 
 #include "plist/Hex.h"
-#include "recorder/store/Statement.h"
+#include "recorder/store/rows/Statement.h"
 
 namespace tarn::recorder {
 

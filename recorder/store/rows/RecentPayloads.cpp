@@ -1,4 +1,4 @@
-#include "recorder/store/RecentPayloads.h"
+#include "recorder/store/rows/RecentPayloads.h"
 
 #include <algorithm>
 

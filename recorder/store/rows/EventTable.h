@@ -23,10 +23,10 @@
 #include <string_view>
 #include <unordered_map>
 
-#include "recorder/store/Connection.h"
-#include "recorder/store/EventGroup.h"
-#include "recorder/store/RecentPayloads.h"
-#include "recorder/store/Statement.h"
+#include "recorder/store/rows/Connection.h"
+#include "recorder/store/rows/EventGroup.h"
+#include "recorder/store/rows/RecentPayloads.h"
+#include "recorder/store/rows/Statement.h"
 
 namespace tarn::recorder {
 
