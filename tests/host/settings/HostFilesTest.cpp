@@ -190,7 +190,7 @@ TEST(HostConfiguration, OnlyFilesNamedAsSettingsAreDropIns) {
   folder.write("c.toml.d/README", "no settings");
   folder.write("c.toml.d/.hidden.toml", "no settings");
   folder.write("c.toml.d/old.toml~", "no settings");
-  EXPECT_EQ(readConfigurationWithDropIns(folder.path("c.toml"), false).value, HostConfiguration());
+  EXPECT_EQ(readConfigurationWithDropIns(folder.path("c.toml"), false).error.text(), "");
 }
 
 TEST(HostConfiguration, WrongDropInIsToldWithItsFileAndNothingIsTaken) {
@@ -226,7 +226,9 @@ TEST(HostConfiguration, MoreDropInsThanAnybodyHasAreRefused) {
 
 TEST(HostConfiguration, OnlyTheInstalledFileMayBeAbsentBesideItsDropIns) {
   const TemporaryFolder folder;
-  EXPECT_EQ(readConfigurationWithDropIns(folder.path("c.toml"), true).value, HostConfiguration());
+  const Result<HostConfiguration> none = readConfigurationWithDropIns(folder.path("c.toml"), true);
+  EXPECT_TRUE(none.ok());
+  EXPECT_EQ(none.value, HostConfiguration());
   folder.write("c.toml.d/a.toml", "[recorder]\nmax_age_days = 3\n");
   EXPECT_EQ(readConfigurationWithDropIns(folder.path("c.toml"), true).value.recorder.maxAgeDays, 3);
   EXPECT_EQ(readConfigurationWithDropIns(folder.path("c.toml"), false).error.text(),
