@@ -10,9 +10,9 @@
 #include "bench/figures/Figures.h"
 #include "host/machine/LinuxClock.h"
 #include "recorder/Recorder.h"
+#include "recorder/store/reading/EventReader.h"
 #include "recorder/store/rows/Connection.h"
 #include "recorder/store/rows/Statement.h"
-#include "recorder/store/reading/EventReader.h"
 #include "testing/RecordingLog.h"
 
 namespace tarn::bench {

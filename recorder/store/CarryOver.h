@@ -16,12 +16,12 @@
 #include <vector>
 
 #include "plist/Result.h"
-#include "recorder/store/rows/Connection.h"
 #include "recorder/store/EventFile.h"
-#include "recorder/store/rows/EventGroup.h"
-#include "recorder/store/rows/Statement.h"
 #include "recorder/store/retention/IdRange.h"
 #include "recorder/store/retention/RemovedIds.h"
+#include "recorder/store/rows/Connection.h"
+#include "recorder/store/rows/EventGroup.h"
+#include "recorder/store/rows/Statement.h"
 
 namespace tarn::recorder {
 

@@ -26,17 +26,17 @@
 #include "platform/Clock.h"
 #include "plist/Result.h"
 #include "recorder/store/Checkpointer.h"
-#include "recorder/store/rows/Connection.h"
-#include "recorder/store/rows/EventGroup.h"
-#include "recorder/store/rows/EventTable.h"
 #include "recorder/store/RecorderTime.h"
 #include "recorder/store/Retention.h"
-#include "recorder/store/rows/Statement.h"
+#include "recorder/store/SessionCheck.h"
+#include "recorder/store/SessionTable.h"
 #include "recorder/store/StoreCheck.h"
 #include "recorder/store/files/StoreFiles.h"
 #include "recorder/store/retention/FileAges.h"
-#include "recorder/store/SessionCheck.h"
-#include "recorder/store/SessionTable.h"
+#include "recorder/store/rows/Connection.h"
+#include "recorder/store/rows/EventGroup.h"
+#include "recorder/store/rows/EventTable.h"
+#include "recorder/store/rows/Statement.h"
 
 namespace tarn::recorder {
 

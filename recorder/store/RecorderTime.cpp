@@ -6,8 +6,8 @@
 #include <cmath>
 #include <fstream>
 
-#include "recorder/store/rows/Statement.h"
 #include "recorder/store/files/RowHash.h"
+#include "recorder/store/rows/Statement.h"
 
 namespace tarn::recorder {
 

@@ -25,12 +25,12 @@
 #include <vector>
 
 #include "plist/ThreadSafety.h"
-#include "recorder/store/rows/Connection.h"
-#include "recorder/store/rows/Statement.h"
 #include "recorder/store/retention/EventOwner.h"
 #include "recorder/store/retention/EventRemoval.h"
 #include "recorder/store/retention/EventScan.h"
 #include "recorder/store/retention/Shares.h"
+#include "recorder/store/rows/Connection.h"
+#include "recorder/store/rows/Statement.h"
 
 namespace tarn::recorder {
 

@@ -9,10 +9,10 @@
 #include <vector>
 
 #include "plist/Result.h"
+#include "recorder/store/SessionSums.h"
+#include "recorder/store/StoreCheck.h"
 #include "recorder/store/rows/Connection.h"
 #include "recorder/store/rows/Statement.h"
-#include "recorder/store/StoreCheck.h"
-#include "recorder/store/SessionSums.h"
 
 namespace tarn::recorder {
 

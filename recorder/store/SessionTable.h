@@ -19,9 +19,9 @@
 #include <vector>
 
 #include "platform/SessionRecords.h"
+#include "recorder/store/SessionSums.h"
 #include "recorder/store/rows/Connection.h"
 #include "recorder/store/rows/Statement.h"
-#include "recorder/store/SessionSums.h"
 
 namespace tarn::recorder {
 

@@ -11,11 +11,11 @@
 #include <vector>
 
 #include "plist/Result.h"
+#include "recorder/store/retention/IdRange.h"
+#include "recorder/store/retention/RemovedIds.h"
 #include "recorder/store/rows/Connection.h"
 #include "recorder/store/rows/EventGroup.h"
 #include "recorder/store/rows/Statement.h"
-#include "recorder/store/retention/IdRange.h"
-#include "recorder/store/retention/RemovedIds.h"
 
 namespace tarn::recorder {
 

@@ -7,9 +7,9 @@
 #include <string>
 #include <string_view>
 
-#include "recorder/store/rows/Statement.h"
-#include "recorder/store/StoreViews.h"
 #include "recorder/store/SessionSums.h"
+#include "recorder/store/StoreViews.h"
+#include "recorder/store/rows/Statement.h"
 
 namespace tarn::recorder {
 

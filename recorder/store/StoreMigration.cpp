@@ -5,9 +5,9 @@
 #include <limits>
 #include <string>
 
+#include "recorder/store/StoreLayout.h"
 #include "recorder/store/rows/EventTable.h"
 #include "recorder/store/rows/Statement.h"
-#include "recorder/store/StoreLayout.h"
 
 namespace tarn::recorder {
 

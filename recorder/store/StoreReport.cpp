@@ -4,9 +4,9 @@
 
 #include <system_error>
 
-#include "recorder/store/rows/Connection.h"
 #include "recorder/store/StoreLayout.h"
 #include "recorder/store/files/Remedy.h"
+#include "recorder/store/rows/Connection.h"
 
 namespace tarn::recorder {
 

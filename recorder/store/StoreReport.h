@@ -8,8 +8,8 @@
 #include <vector>
 
 #include "plist/Result.h"
-#include "recorder/store/StoreCheck.h"
 #include "recorder/store/SessionCheck.h"
+#include "recorder/store/StoreCheck.h"
 
 namespace tarn::recorder {
 

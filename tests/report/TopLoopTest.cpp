@@ -16,7 +16,7 @@ class FakeSource final : public TopSource {
     ++looks_;
     TopSample sample;
     if (looks_ - 1 < isUp_.size() ? isUp_[looks_ - 1] : isUp_.back()) {
-      sample.status = plist::Dictionary{{"frames_received", static_cast<std::int64_t>(10 * looks_)}};
+      sample.status = plist::Dictionary{{"frames_received", static_cast<std::int64_t>(10 * looks_ * looks_)}};
     } else {
       sample.whyNot = "nobody listens";
     }
@@ -78,7 +78,7 @@ TEST_F(TopLoop, EachViewKnowsTheLookBeforeIt) {
   static_cast<void>(runTop(source_, screen_, 3));
   ASSERT_EQ(screen_.views().size(), 3U);
   EXPECT_FALSE(screen_.views()[0].ledger.at(0).rate);
-  EXPECT_EQ(screen_.views()[2].ledger.at(0).rate, 10);
+  EXPECT_EQ(screen_.views()[2].ledger.at(0).rate, 50);  // from 40 to 90
 }
 
 TEST_F(TopLoop, EndsQuietlyWhenNobodyLooks) {

@@ -10,9 +10,9 @@
 #include <string>
 
 #include "plist/Result.h"
+#include "recorder/store/reading/StoreAccess.h"
 #include "recorder/store/rows/Connection.h"
 #include "recorder/store/rows/Statement.h"
-#include "recorder/store/reading/StoreAccess.h"
 
 namespace tarn::report {
 

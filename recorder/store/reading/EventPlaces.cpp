@@ -8,9 +8,9 @@
 #include <string_view>
 #include <utility>
 
-#include "recorder/store/rows/EventTable.h"
 #include "recorder/store/GlobPattern.h"
 #include "recorder/store/reading/EventReader.h"
+#include "recorder/store/rows/EventTable.h"
 
 namespace tarn::recorder {
 

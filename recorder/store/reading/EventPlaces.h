@@ -8,10 +8,10 @@
 #include <vector>
 
 #include "plist/Result.h"
-#include "recorder/store/rows/Connection.h"
-#include "recorder/store/rows/Statement.h"
 #include "recorder/store/StoreCheck.h"
 #include "recorder/store/StoreLayout.h"
+#include "recorder/store/rows/Connection.h"
+#include "recorder/store/rows/Statement.h"
 
 namespace tarn::recorder {
 

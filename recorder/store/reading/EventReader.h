@@ -18,10 +18,10 @@
 #include <vector>
 
 #include "plist/Result.h"
-#include "recorder/store/rows/Connection.h"
-#include "recorder/store/rows/Statement.h"
 #include "recorder/store/StoreCheck.h"
 #include "recorder/store/files/ChangeWatch.h"
+#include "recorder/store/rows/Connection.h"
+#include "recorder/store/rows/Statement.h"
 
 namespace tarn::recorder {
 

@@ -20,10 +20,10 @@
 #include <vector>
 
 #include "plist/Result.h"
-#include "recorder/store/rows/Connection.h"
-#include "recorder/store/rows/Statement.h"
 #include "recorder/store/reading/EventReader.h"
 #include "recorder/store/reading/StoreAccess.h"
+#include "recorder/store/rows/Connection.h"
+#include "recorder/store/rows/Statement.h"
 
 namespace tarn::recorder {
 

@@ -13,10 +13,10 @@
 #include <string>
 #include <vector>
 
+#include "recorder/store/retention/RemovedIds.h"
 #include "recorder/store/rows/Connection.h"
 #include "recorder/store/rows/EventGroup.h"
 #include "recorder/store/rows/Statement.h"
-#include "recorder/store/retention/RemovedIds.h"
 
 namespace tarn::recorder {
 

@@ -9,9 +9,9 @@
 #include <unordered_map>
 #include <vector>
 
+#include "recorder/store/retention/EventOwner.h"
 #include "recorder/store/rows/Connection.h"
 #include "recorder/store/rows/Statement.h"
-#include "recorder/store/retention/EventOwner.h"
 
 namespace tarn::recorder {
 

@@ -5,8 +5,8 @@
 #include <algorithm>
 #include <string>
 
-#include "recorder/store/rows/EventTable.h"
 #include "recorder/store/files/RowHash.h"
+#include "recorder/store/rows/EventTable.h"
 
 namespace tarn::recorder {
 

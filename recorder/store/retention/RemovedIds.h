@@ -12,9 +12,9 @@
 #include <cstdint>
 #include <vector>
 
+#include "recorder/store/retention/IdRange.h"
 #include "recorder/store/rows/Connection.h"
 #include "recorder/store/rows/Statement.h"
-#include "recorder/store/retention/IdRange.h"
 
 namespace tarn::recorder {
 

@@ -132,7 +132,7 @@ void Writer::addRepeated(const RepeatedRow& row) {
   if (found->isDerived) return;
   SessionMessage message = *found;
   const plist::ValueView stamp = message.payload.get(keys::kTimestamp);
-  const bool isDate = stamp.isText() && secondsOfDateText(stamp.text());
+  const bool isDate = stamp.isText() && report::secondsOfDateText(stamp.text());
   if (row.stamp) {
     isDate ? message.payload.set(keys::kTimestamp, plist::Date{*row.stamp})
            : message.payload.set(keys::kTimestamp, *row.stamp);
