@@ -74,7 +74,7 @@ class SessionStore {
     note.time = time_;
     note.facts = {kReporterID,    1, 812, 1000, "player", "sys.oxbow.music." + std::to_string(session % 8), 7,
                   "longformaudio"};
-    note.period = session;
+    note.number = session;
     note.messages = kSessionMessages;
     note.end = platform::SessionEnd::Stopped;
     recorder_.note(std::move(note));
