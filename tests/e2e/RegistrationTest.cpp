@@ -1,6 +1,8 @@
 // The accessory registration, which declines every session.
 #include <gtest/gtest.h>
 
+#include <csignal>
+
 #include "tests/e2e/support/ServiceFixture.h"
 
 namespace tarn::e2e {
@@ -14,6 +16,7 @@ TEST_F(Registration, DeclinesASessionAndSaysSo) {
 {"op":"startReportingSessionForID","reporterID":1}
 {"op":"stopReportingSessionForID","reporterID":1}
 )");
+  ASSERT_EQ(stopService(SIGTERM), 0);  // all of the log is written then
   EXPECT_TRUE(logSays(" debug tarnrz TarnReportingSessionAudioRegistrationWorker:"));
   EXPECT_TRUE(logSays(" TarnReportingSessionAudioRegistrationWorker unsupported\n"));
   EXPECT_TRUE(logSays("action=failure worker=TarnReportingSessionAudioRegistrationWorker reporterID=1"));

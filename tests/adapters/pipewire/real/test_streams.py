@@ -99,6 +99,8 @@ class Managed(Headless):
         self.heard("follower")
         self.tool("pw-metadata", "0", "default.configured.audio.sink", '{ "name": "headset" }', "Spa:String:JSON")
         self.plays_to("follower", "headset")
+        # PipeWire may tell of the link before it tells of the default.
+        self.assertTrue(eventually(lambda: self.routes(self.sessions("follower")[0])[-1]["device_is_default"]))
         self.end(player)
         session = self.one("follower")
         told = self.routes(session)
