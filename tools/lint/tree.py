@@ -11,8 +11,8 @@ from dataclasses import dataclass
 
 CXX = (".cpp", ".h")
 SCRIPTS = (".py", ".sh")
-TEXTS = CXX + SCRIPTS + (".hpp", ".md", ".txt", ".cmake", ".toml", ".json", ".jsonl", ".service", ".socket", ".conf",
-                         ".in")
+TEXTS = CXX + SCRIPTS + (".c", ".hpp", ".md", ".txt", ".cmake", ".toml", ".json", ".jsonl", ".service", ".socket",
+                         ".conf", ".in")
 # Seeds of the fuzzers are meant to be wrong.
 RAW = ("fuzz/corpus/",)
 NAMES = ("dev", "run", ".clang-tidy", ".clang-format", ".gitignore")
