@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
 """Makes from dictionary/messages.toml what is made from it: the data dictionary, the clients' constants and
 reports, and the table
 that tarnreportingctl looks at.

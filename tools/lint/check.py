@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
 """Runs the checks of this folder over the tree and prints what they find, a line each. Exit 1 when there is anything.
 
 usage: check.py [include_graph|banned_calls|bodies|dictionary|seeds|sizes|statics|wording ...]

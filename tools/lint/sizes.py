@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """How long a file may be, and how much a folder holds: what is beyond is two jobs. clang-tidy watches the length of
 functions.
 """

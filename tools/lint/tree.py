@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """The files that the checks look at, as texts by path, and the means to look at code without its comments.
 
 A check takes a Tree and returns findings, so that its tests can hand it a tree of their own making.

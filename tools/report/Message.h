@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Message: what an analytics event says of a message of a session, with its fields by their keys.
 //
 // Every message becomes two analytics events and, as a rule, one of the mirrored session; the one that is named after
