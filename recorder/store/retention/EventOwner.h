@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // EventOwner: whose an event is, of which sort, and how much of the file it counts for, as retention sees it.
 //
 // Which problem: an event's texts are shared with others', of other users too, so what it takes on the disk changes

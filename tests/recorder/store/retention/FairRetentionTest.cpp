@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // For space go the events of whoever has most, messages before summaries.
 #include <poll.h>
 #include <unistd.h>

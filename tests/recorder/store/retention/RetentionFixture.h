@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RetentionFixture: the recorder's file under retention, one transaction at a time, with sessions of several users.
 #pragma once
 
