@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // tarnreportingbench: measures the service and its peers and prints one table. See docs/benchmarks.md.
 #include <CLI/CLI.hpp>
 #include <cmath>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A session in this process, and messages for it. It needs a SessionPlatform.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Measuring: the clock, medians, and how figures are written.
 //
 // Machines are noisy, so what is compared takes turns: a round measures ours and each peer once, and the figures are

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The message that every figure uses: 12 keys of the kinds that clients send, about 305 bytes of CBOR. One place, so
 // that the figures of all programs here can be compared.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Poster: a client of the posting library with one session, a shape of twelve keys (those of the message that the other
 // figures use) and one writer or more.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the benchmarks ask of the system about processes: starting and ending them, where they run, what they use.
 //
 // The benchmark has no threads of its own, so a child may be forked at any time. Threads: one.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Receiver: a process that takes messages and answers each: the service or a peer. What is measured beside each other
 // is driven by the same code.
 //

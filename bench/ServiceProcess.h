@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ServiceProcess: a tarnreportingd of its own, on a private socket and state directory, ended with the object.
 #pragma once
 

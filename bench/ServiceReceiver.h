@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ServiceReceiver: the service with one started session of type "generic", driven through the client library. Every
 // message is different from those before, so none is redundant and all are logged.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SessionPlatform: the platform under sessions that are measured in this process: the fakes of the tests, but for the
 // facilities that a message meets, since the fakes note down everything. The back-ends that a device may lack are
 // missing until they are offered, so their workers decline.

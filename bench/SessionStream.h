@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What clients send to a session whose stop is measured: an ordinary mixture, and two that only wear the stop out.
 // Messages of a stream are all different, so that each is logged.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Table: the one table that the program prints: a row for each figure and each peer or limit that it stands beside.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ViewSink: takes a message as views into its bytes and refuses repeated keys, as the service's own sink does; it only
 // makes no dictionary. The service itself always makes one.
 #pragma once

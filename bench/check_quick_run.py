@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
 """Whether a quick run of the benchmark prints the whole table: every row, with its figure and what stands beside it.
 
 usage: check_quick_run.py PROGRAM

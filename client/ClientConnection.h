@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ClientConnection: what tarnkit::TarnReportingClient stands on, and the tools with it: the same client with the
 // requests and values of the wire. What it promises stands in that class's header.
 #pragma once

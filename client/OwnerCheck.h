@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // OwnerCheck: the rule that one thread at a time uses a client, made executable. An operation of a second thread would
 // corrupt the stream, so it isn't let in and answers that it was misused.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // PendingReplies: which replies are still to come, and which never will.
 //
 // Which problem: most replies come in the order of their requests, but a start's comes at the stop, and some starts are

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reply: what became of a request, with values of the wire. Plain data, made by the connection and handed over to
 // whoever waits; the owner's form of it is tarnkit::Reply. Threads: one at a time.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // One function for each remote operation: the request, ready for call(), send() or trySend().
 //
 // What an operation takes stands in the table of operations, and makeRequest() holds these functions to it. What the

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Socket: a connected Unix-domain stream socket, closed with its owner. Threads: one at a time.
 //
 // It knows nothing of frames: it moves bytes, as many as the system takes or has at once, and says when that is over.

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # Writes OUTPUT, a source that tells the commit of SOURCE, when that isn't what it tells already. The commit is what
 # packaging/commit names, which an archive of git and the making of packages fill in, else what git says; without both
 # it is empty. Nothing else of the surroundings goes in, so builds of one commit are the same.

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # Build rules shared by every folder: one place for the language level, the warnings and the sanitizers.
 include_guard(GLOBAL)
 

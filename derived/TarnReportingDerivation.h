@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the producers that walk over a session's log at its stop do alike: walk, and send what came out.
 //
 // A walk is a class with `void take(const plist::Dictionary& payload)`, called for each message in order,

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingMessageFields: the few values of a payload that a walk over a session's messages looks at, read once a
 // message, or the running state that such messages are laid over one after the other.
 //

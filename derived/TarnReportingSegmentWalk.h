@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSegmentWalk: cuts the time during which a session's output (or input) ran into segments, at every change
 // that counts, and makes a message of each segment that was long enough.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the walks that cut a session into segments have in common: when the segment began, how values are compared, the
 // buckets of lengths and volumes, and the numbering of the messages that come out.
 //

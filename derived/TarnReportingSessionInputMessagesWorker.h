@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionInputMessagesWorker: when a session stops, cuts the time during which input ran into segments, at
 // every change of the devices, and sends one summary message a segment into the session: how long was recorded, with
 // which voice processing and which voice codecs.

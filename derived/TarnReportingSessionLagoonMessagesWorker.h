@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionLagoonMessagesWorker: when a session stops, cuts the time during which output ran inside a shared
 // group-media session into segments, at every change of a watched value, and sends one summary message a segment into
 // the session. Outside internal builds these go to the analytics events and the summary file alone.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionOrientationMessagesWorker: a producer for the device's orientation that applies to no session. It
 // is in no table of worker classes.
 #pragma once

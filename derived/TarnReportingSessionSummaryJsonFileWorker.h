@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionSummaryJsonFileWorker: shows a whole session in one file. When the session stops, every message
 // of its log that is not redundant, derived ones included, is written into a JSON array in the audio diagnostic-logs
 // directory; for inspection on test devices and internal ones.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionSystemMonitorWorker: brings the device's settings, as the system monitor knows them, into a
 // session's stream of messages: each one that is known when the session starts, and each one that changes while it
 // runs.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionVolumeMessagesWorker: when a session stops, cuts the time during which output ran into segments,
 // at every change of format, devices, spatialisation, ringer or volume, and sends one summary message a segment into
 // the session: how long was played, and how.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSystemMonitor: a live picture of the few settings of the device that matter to audio analytics, and the
 // service's own defaults.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSystemMonitorDictionary: the last state of each device setting that the system monitor watches, and who
 // wants to know when one changes.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingDiagnosticDefaults: the defaults suite that switches the diagnostic workers on and tunes them.
 //
 // It reads and writes the platform's store at once and keeps nothing. Threads: any.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingMemoryLogLimiter: lets a memory log through once in 5 seconds.
 //
 // The tools that make one are a burden to a device that is short of memory already. One limiter serves all sessions.

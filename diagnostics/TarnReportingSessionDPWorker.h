@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionDPWorker: answers an audio I/O overload with a request for a gyre, a stack-sampling trace of the
 // whole device, so that the cause of the overload can be studied.
 //

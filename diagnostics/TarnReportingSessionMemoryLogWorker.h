@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionMemoryLogWorker: answers a message of type MemoryLog with what two memory tools of the device
 // print, written to the log in numbered blocks, so that a problem of wired memory can be studied from the log alone.
 //

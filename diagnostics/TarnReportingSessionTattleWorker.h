@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionTattleWorker: offers the person at an internal build to file a bug report when a Parley call
 // hands the audio layer invalid spatial coordinates.
 //

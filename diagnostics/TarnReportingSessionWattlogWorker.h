@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionWattlogWorker: logs what haptics messages say about power in the device's power log, as they
 // arrive: how long an engine was on, that it went on or off, and that a session left the hardware running.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // MessageDictionary: what can be said to the service and what it says itself, as a table: the names of categories,
 // types and service types, the keys that some part reads or writes, and the messages that the service derives.
 //

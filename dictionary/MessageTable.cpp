@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The table of what can be said.
 //
 // Made by tools/dictionary/generate.py from dictionary/messages.toml: change that, not this.

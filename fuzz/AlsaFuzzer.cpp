@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Bytes as the kernel's texts on a PCM substream: a state and a direction that are known, names that are printable.
 #include <cstddef>
 #include <cstdint>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Bytes as a binary property list: whatever they are, they read as a value within the bounds or as a fault with its
 // place.
 #include <algorithm>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Bytes as what up to three clients do with a service on a platform of fakes, one operation after the other: replies,
 // what the workers see and what lies in every session must be as ClientsModel says.
 #include <array>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The slow and obvious model of a service with several clients: who has which session, what lies in its log, which
 // replies come and what the two workers of ClientsFuzzer see, all of it in one list in its order.
 //

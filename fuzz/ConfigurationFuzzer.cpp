@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Bytes as a configuration file: they give a configuration within its ranges or one line that names the file.
 #include <cstddef>
 #include <cstdint>

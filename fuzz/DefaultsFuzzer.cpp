@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Bytes as a defaults file: whatever they are, they read as a value or as a fault with its place, and what was read is
 // written so that it reads back equal.
 #include <cstddef>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Bytes as the recorder's file: whatever they are, reading ends with no more rows than were asked for or with an
 // error, and the file stays as it was.
 #include <unistd.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Bytes as a driver's file of report channels: channels that are whole and within the bounds, or a complaint.
 #include <cmath>
 #include <cstddef>

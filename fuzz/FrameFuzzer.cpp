@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Feeds a byte stream, in pieces whose sizes it picks itself, through the frame buffer and the request decoder; what
 // was accepted must encode and decode to the same again.
 #include <algorithm>

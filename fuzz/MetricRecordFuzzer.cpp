@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reads bytes as a metric record. Whatever was read must be written, read back and rendered, and be the same record.
 #include <cstddef>
 #include <cstdint>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Feeds bytes to the reply decoder; the results that it accepts must be values that can be encoded.
 #include <cstddef>
 #include <cstdint>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reads a ring whose positions and data are the input's, as the service does: head and taken in the first sixteen
 // bytes, then the data area. What is read must stay within the ring, and an accepted message must be of its shape.
 #include <algorithm>

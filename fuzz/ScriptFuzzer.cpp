@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Scripts come from people and programs: no line may do more than be refused, and every step that comes out of one has
 // what its operation needs.
 #include <algorithm>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Bytes as a performance trace and, after the first NUL, as descriptions of probes: they give intervals within the
 // trace or a failure, and probes of those intervals.
 #include <algorithm>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // HostSetup: what the service reads and takes hold of before anything of it runs: its settings, the right to its socket
 // and to its state directory, its log.
 //

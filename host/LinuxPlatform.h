@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LinuxPlatform: the twin of testing/FakePlatform. It owns the machine's facilities, the loop, and the recorder with
 // its stand-ins for the back-ends; it hands them out as Facilities, and knows what holds between them: what comes in is
 // held up while what it becomes piles up, what `status` answers, and in which order all of it ends.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // NoTallyService: the analytics-event service of a machine that has none: nobody wants an event. It stands there
 // because every platform has this facility, where others may be lacking: workers ask it before they form an event, and
 // so form none.

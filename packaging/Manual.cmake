@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # Manual pages and completions, made from docs/ and from the programs' tables of options (tools/manual). What they need
 # isn't everywhere; then they are left out.
 find_package(Python3 COMPONENTS Interpreter)

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 # What of an installation depends on its prefix: the paths inside the units, and the place of the configuration, which
 # for /usr is /etc and for a prefix in /opt lies below /etc too. The service looks for it there (HostPaths).
 set(prefix "${CMAKE_INSTALL_PREFIX}")

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // AccessoryQueries: the wireless earbuds that this device knows. Threads: the server queue; enumerate may take a while.
 #pragma once
 

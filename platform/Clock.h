@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Clock: every notion of time that the system has, so that a test can own all of them.
 //
 // Threads: any.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // CommandRunner: runs a tool of the device through the system shell and gives what it prints.
 //
 // Threads: any; one running command is for one thread at a time, several may run at once. readLine and close block.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Condition: a lockable condition variable for the rare place where the server queue must wait for a back-end.
 //
 // Such a wait is deliberate: the platform doesn't take it for a hang (up to 180 seconds, the longest that a worker may

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // DefaultsStore: small settings that outlive a restart, by suite (or application domain) and key.
 //
 // Reads see what other processes have written. A store that can't be read is logged by the platform and reads as empty.

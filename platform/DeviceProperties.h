@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // DeviceProperties: what the device is. Threads: any.
 #pragma once
 

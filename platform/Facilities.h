@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Facilities: everything outside the process that the system may touch, as one struct. The entry point (or a test's
 // fixture) makes it and installs it once; what it refers to outlives all use.
 //

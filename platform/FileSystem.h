@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FileSystem: the few files that the system writes and reads by itself. Paths are absolute.
 //
 // Threads: any; one open file is for one thread at a time. Calls take as long as the disk does.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FlumeService: the report channels in which drivers publish what they count.
 //
 // Use: copyChannels of a group, subscribe to them once, createSamples as often as wanted, createDelta of two samples.

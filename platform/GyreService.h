@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // GyreService: requests for a stack-sampling trace of the whole device. Threads: the server queue.
 #pragma once
 

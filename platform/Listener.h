@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Listener and Connection: how clients reach the service. Threads: the platform's own, which on Linux is the thread
 // that also serves the server queue.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LocalCalendar: moments in the device's time zone, on the Gregorian calendar. Threads: any.
 #pragma once
 

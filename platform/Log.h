@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Log: where log entries go. The one logging helper of the system forms the entries; a sink writes them.
 //
 // Threads: any.

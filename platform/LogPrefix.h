@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What every log line begins with: the module, flush right, and the line of its source.
 //
 // Stateless. Threads: any.

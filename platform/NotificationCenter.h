@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // NotificationCenter: named system notifications, each with a 64-bit state word. Threads: the server queue's; post()
 // any.
 #pragma once

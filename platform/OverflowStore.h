@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // OverflowStore: where the oldest messages of the sessions' logs wait when memory has no room for them.
 //
 // What lies there is the process's own for as long as it runs: nothing of it is found again by a later run, and nobody

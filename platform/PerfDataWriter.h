@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // PerfDataWriter: writes a perf-data result file, which a performance-test database takes in.
 //
 // Threads: the server queue; one writer is for one thread at a time. A failure while writing shows at close().

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // PerformanceTraceService: records a trace of the device's performance into a file.
 //
 // Life of a trace: start, performanceTraceDidStart, ... stop, performanceTraceDidStop, performanceTraceDidComplete with

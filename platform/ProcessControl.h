@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ProcessControl: the end of the process. Threads: any.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ProcessEnvironment: the environment variables of this process, for libraries that are told things by them.
 //
 // Threads: any, but a library that reads the environment at the same time may see either value; set variables before

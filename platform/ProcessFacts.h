@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ProcessFacts: facts about processes and the machine that reports carry. Threads: any.
 #pragma once
 

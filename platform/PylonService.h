@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // PylonService: the wireless-diagnostics metrics of the device. Threads: the server queue.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RandomSource: numbers that nobody can foresee. Threads: any.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RtcReportingService: the service that gathers telemetry sessions of real-time communication from many processes.
 //
 //   newHierarchyToken() -> createSession() -> startConfiguration() -> sendMessage() ... -> flushMessages()

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SessionRecords: who keeps a record of the sessions: which there were, whose, when they ran and how they ended; and on
 // whose behalf a thread works, so that what it hands over to a back-end is known as that session's.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Signposts: tell a performance trace what the service does: intervals with a begin and an end, and single marks.
 //
 // While nothing records, whoever sets a signpost pays for one look at the switch: it is kept outside the virtual

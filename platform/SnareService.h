@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SnareService: the automatic bug capture of the device. A reporter asks it for a snapshot of the logs, or for a
 // capture that runs for a while and can be cancelled.
 //

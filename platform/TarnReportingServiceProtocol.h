@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingServiceProtocol: the remote interface, the only way into the service. A listener's connections call the
 // object that the service exports to them, with arguments that are already decoded and checked.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TattleService: the prompt that offers the person at the device to file a bug report from a prepared draft. The
 // service asks for that person's consent; nothing is filed without it.
 //

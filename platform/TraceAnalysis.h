@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TraceAnalysis: the optional library that reads finished performance traces; loaded when it is first wanted.
 //
 //   load() -> library -> openTrace(file) -> model -> allSignpostIntervals()

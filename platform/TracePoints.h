@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TracePoints: informational marks in the system's trace, by code. Threads: any. A platform without a tracer drops
 // them.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // UniqueFunction: a move-only callable with room for small ones inside itself.
 //
 // Replies, queue work and handlers are made and used once each, many thousands of times a second; std::function would

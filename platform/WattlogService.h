@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // WattlogService: the power log of the device. Threads: the server queue.
 #pragma once
 

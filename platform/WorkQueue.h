@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // WorkQueue: a serial queue. Work is run one piece at a time, in the order in which it was handed over.
 //
 // Threads: work may be handed over on any thread, that of the queue included. Nothing handed over is ever refused or

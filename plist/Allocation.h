@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Memory of the C library's allocator, whose blocks can grow in place, under the rules of operator new: where there is
 // none, the installed handler may find some; else std::bad_alloc.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A moment as a calendar date and time of day in UTC (proleptic Gregorian). For every text form of a date, and for the
 // names of files; local time is the platform's (LocalCalendar). Stateless. Threads: any.
 #pragma once

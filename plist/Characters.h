@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Characters: UTF-8 one character at a time, for the readers and writers of property-list files. Stateless. Threads:
 // any.
 #pragma once

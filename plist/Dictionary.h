@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Dictionary and Array: property-list containers with value semantics and cheap copies.
 //
 // Which problem: a session keeps up to millions of messages, hands each to many workers, and must never let one holder

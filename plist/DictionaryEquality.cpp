@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The comparison of dictionaries that leaves out some keys: of every message with the one before it.
 #include <algorithm>
 #include <cstring>

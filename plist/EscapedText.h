@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Texts with what would be mistaken escaped: the one place that knows how a control character is written.
 //
 // Stateless. Threads: any.

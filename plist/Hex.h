@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Bytes in hexadecimal, two small digits each: "\x00\x9F" is 009f. For data in texts, metrics' bytes in what is
 // recorded, and characters that can't be shown. Stateless. Threads: any. Allocates for `out` alone.
 #pragma once

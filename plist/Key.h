@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Key: the name of a dictionary entry, stored once for the whole process.
 //
 // Messages repeat a few hundred names without end. A Key is a counted handle on the one copy of its text, so that a

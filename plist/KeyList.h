@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // KeyList: the ordered, repeat-free list of a dictionary's keys, shared by every dictionary that has just these keys in
 // this order.
 //

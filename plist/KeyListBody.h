@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The shared body of a key list. Internal to plist/.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The one copy of a key's text. Internal to plist/.
 #pragma once
 

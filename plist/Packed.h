@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The packed form of values inside a dictionary's or an array's block. Internal to plist/.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // PackedBuilder: makes a dictionary or an array out of values that arrive one by one, in one allocation of just the
 // right size. For decoders; the scratch space is kept between uses.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // PackedImage: dictionaries as plain bytes and back, for whoever keeps them outside the memory for a while.
 //
 //   dictionary    [number of its key list 4][bytes 4][packed values]; bytes is kHoldsContainers where some do

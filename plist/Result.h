@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Status and Result: what an operation gives that can fail. An error is a value: nothing is thrown.
 //
 //   if (const Status written = writeAll(file, bytes); written.failed()) log(written->text);

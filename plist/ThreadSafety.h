@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Locks whose use the compiler checks: what a lock guards says so where it is declared, and touching it without the
 // lock is an error (clang's -Wthread-safety, part of ./dev lint). Other compilers read none of the notes.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Value: a property-list value that owns itself; what a ValueView looks at when the value must outlive its place.
 //
 //   ValueView view = message.get("volume");    looks into the message

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ValueView: a property-list value that lies somewhere else: inside a dictionary or an array, in a decoder's input, in
 // a local variable. The argument and result type of everything that stores or reads values.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // CommitPace: how fast events are committed just now, and so how many may wait for it.
 //
 // What a crash may cost is a time. How many events that is depends on disk and processor, and both may be taken by

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // EventWriter: writes batches of events into the recorder's file and copes with whatever happens to that file.
 //
 // Owner: the recorder. Threads: all calls on the recorder's writer thread.

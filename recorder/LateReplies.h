@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LateReplies: the replies of a stand-in that come after the call that asked for them: one by one, in the order of the
 // calls, as work of a queue of their own, each once its delay has passed.
 //

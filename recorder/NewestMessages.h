@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // NewestMessages: which event has the newest message of each kind of each session, so that a message that repeats one
 // is stored with the id of what it repeats.
 //

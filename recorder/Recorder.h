@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Recorder: stands in for the device's back-end services. What they would have received goes into one SQLite database,
 // events(id, time, backend, name, payload, detail), readable while it is written.
 //

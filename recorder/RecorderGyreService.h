@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RecorderGyreService: the stack-sampling service as the recorder stands in for it: requests are recorded under
 // back-end "gyre", and no stack is sampled. The message copy is the payload; who asked, why and with which options is
 // the detail.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RecorderLog: the recorder's log lines. The recorder works below the logging helper of the service and writes to the
 // sink that it is given; the lines look the same: category "tarnrs", the prefix with the module "Recorder" and the
 // caller's line.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RecorderOptions: where the recorder writes and every bound that it keeps, with what happens at each. Plain data, read
 // once when the recorder is made; the configuration sets the retention, the rest are constants but for tests.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RecorderPylonService: the metric service as the recorder stands in for it. A metric is recorded under back-end
 // "pylon" by its identifier in decimal: the fields of its text rendering, and its bytes on the wire as `wire`, in
 // lower-case hexadecimal. So a metric can be read by people and compared byte by byte.

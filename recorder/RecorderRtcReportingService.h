@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RecorderRtcReportingService: the real-time-communication reporting service as the recorder stands in for it. Making a
 // session, each message and each flush are recorded under back-end "rtc" with the session's number, which counts from
 // 1 in each run.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RecorderSessionRecords: keeps the record of the sessions in the recorder's file, in order with the events and as safe
 // as they are. What is told waits with the events until the writer comes to it.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RecorderSnareService: the bug-capture service as the recorder stands in for it. Requests and cancels are recorded
 // under back-end "snare" when they are made; the replies come on a queue of the service's own.
 //

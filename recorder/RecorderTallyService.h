@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RecorderTallyService: the analytics-event service as the recorder stands in for it. The configuration says which
 // names are in use; what is handed over is recorded under back-end "tally".
 //

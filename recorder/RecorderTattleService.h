@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RecorderTattleService: the bug-filing prompt as the recorder stands in for it: drafts are recorded under back-end
 // "tattle", with the text that people would have been shown and the process that it is about, where one is known. There
 // is nobody to ask, so every draft counts as taken.

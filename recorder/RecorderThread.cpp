@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The thread of Recorder that writes: from the groups that were handed over to what is told of their commits.
 #include <sys/resource.h>
 

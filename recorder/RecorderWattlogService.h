@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RecorderWattlogService: the power log as the recorder stands in for it. An event is recorded under back-end "wattlog"
 // by its name, with the agent that logged it as `agent`. Every event is wanted here: unlike analytics events, nobody
 // asks beforehand.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingClientServerInstance: one connected client. It is the object that the connection exports to the peer, so
 // it implements every operation of the remote interface, and it owns the client's sessions.
 //

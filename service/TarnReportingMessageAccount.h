@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingMessageAccount: one message's way into the counts. It gets exactly one outcome there, also when its work
 // ends in the middle because memory is missing: then it counts as refused.
 //

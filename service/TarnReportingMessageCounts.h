@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingMessageCounts: what became of the messages that clients sent. Each message that was dealt with is in
 // exactly one of the members; of several sessions' outcomes the best counts, in the order of TarnReportingOutcome.
 // Plain data.

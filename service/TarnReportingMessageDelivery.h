@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingMessageDelivery: a message on its way to its sessions. A list of IDs may be long and a broadcast wide,
 // so the look-up and the hand-over are done in slices.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingService: the process's one service object. It accepts connections, keeps the list of connected clients,
 // finds sessions across all of them, and owns the single-message session, which takes the messages that are sent
 // without a reporter ID while no session runs.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingServiceDelegateProtocol: what a client's connection may ask of the service.
 //
 // Threads: the server queue; the look-ups by ID and removeClient take the service's lock as well.

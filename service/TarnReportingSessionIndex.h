@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionIndex: what all clients' sessions are together, so that nobody has to go through the clients for
 // it: who has a session under an ID, which clients have sessions at all, how many there are and run.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionListing: the listing of all clients' reporter IDs, in slices.
 //
 // Owned by the piece of work that does its next slice. Threads: the server queue.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionMap: a client's sessions by reporter ID, in the order in which the client made them.
 //
 // A client may have many sessions and asks for one with every message, so it is found by a hash; what lists or stops

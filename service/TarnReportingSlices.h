@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Long work on the server queue is done in slices: it tells what it has cost, and hands over its rest when others are
 // to have their turn.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The table of worker classes. Its order is the order in which a session makes its workers and, within consumers,
 // producers and the rest, starts and stops them.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // tarnreportingd: options, platform, service, serve. It owns no behaviour; what a part does is told where the part is.
 //
 // A signal ends the clients in order, with their sessions. The process then ends without tearing the parts down: what

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSession: one reporting session of one client: its reporter ID, service type and configuration, the log
 // of the messages since it was started, and the workers that turn those messages into reports.
 //

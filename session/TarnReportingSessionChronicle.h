@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionChronicle: what the platform's session records are told of one session: its making, its periods
 // and its end; and the number under which the session's work is known.
 //

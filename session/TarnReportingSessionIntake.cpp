@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The intake of TarnReportingSession: what happens to a message before any worker sees it, and to whom it goes.
 #include <array>
 #include <cassert>

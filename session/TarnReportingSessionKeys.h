@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The keys that the system itself puts into messages, interned once.
 //
 // Workers look at several of these with every message; a key that is interned compares by its address.

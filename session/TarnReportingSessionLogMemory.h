@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionLogMemory: how much memory all message lists of the process take, and who gives some back when
 // that is too much.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionMessage: one message on its way through a session, with the flags that the session sets.
 //
 // A session keeps up to millions of these, so a record is 24 bytes beside its payload. Records are shared: the

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionMessageList: a list of records that may be longer than the memory has room for.
 //
 //   [page][page][page] ... [record][record][record]

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionMessageLog: the records of a session since its start, in order, and the look-up for the
 // redundancy rule.
 //

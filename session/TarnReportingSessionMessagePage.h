@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionMessagePage: some records in a row of a message list, as plain bytes in the platform's overflow
 // store. A page never changes; who changes a record makes a new page.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // How TarnReportingSessionMessageList sorts what doesn't fit into memory.
 //
 // Clients nearly always send in time order, so what is in order is left alone. Pages in a row whose times don't overlap

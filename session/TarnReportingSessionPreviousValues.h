@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionPreviousValues: for every key ever seen in a message of a session, its latest value.
 //
 // Which problem: every message, a dozen keys and more, is merged here. How: messages come in a few shapes over and

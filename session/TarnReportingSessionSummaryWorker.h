@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionSummaryWorker: counts a session's activity and, when the session stops, sends one summary message
 // back into it, where the consumers that still run get it like any client's message.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionTallyWorker: forwards every message of a session, as it arrives, to the analytics-event service,
 // under two event names: one of the message's category and type, one with the session's service name before them.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What a session's workers are.
 //
 // A session does no reporting itself: its workers look at its messages and forward, aggregate or derive something, each

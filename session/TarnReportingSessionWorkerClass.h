@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionWorkerClass: one row of the table of worker classes, read off the class itself, so that a row
 // can't disagree with its class; and the lists that the session derives from the table.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionWorkerSet: the workers of one session; which are made, in which order they start and stop, and
 // which of them get a message.
 //

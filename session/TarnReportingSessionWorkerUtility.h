@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionWorkerUtility: algorithms over messages that several workers share. Never made.
 //
 // Threads: the server queue.

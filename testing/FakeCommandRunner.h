@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeCommandRunner: tools whose output a test wrote down. A command that nobody described is not found, as the shell
 // would answer.
 //

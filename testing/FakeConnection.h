@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeConnection: one client's connection; the test plays the client by calling the exported object.
 //
 // Threads: one at a time.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeDefaultsStore: a defaults store in memory. A suite and an application domain of one name are one and the same.
 //
 // Threads: any.

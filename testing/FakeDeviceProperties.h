@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeDeviceProperties: device properties that a test sets; without that the device doesn't tell. Threads: any.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeFileSystem: files in memory. A path needs its directory, as on a disk.
 //
 // Threads: any.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeListener: a listener at which the test connects clients. Threads: one at a time.
 #pragma once
 

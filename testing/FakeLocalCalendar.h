@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeLocalCalendar: a calendar with one offset from UTC all the year; UTC itself until a test says otherwise.
 //
 // Threads: one at a time.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeNotificationCenter: named notifications in memory, delivered on the queues that were given.
 //
 // A name has no state word until one is set or it is posted (a post without a word makes it 0); reading one that isn't

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeOverflowStore: an overflow store in memory, with faults. Its bounds are those of a service unless a test sets
 // others before the first session is made. Threads: any, but for the controls.
 #pragma once

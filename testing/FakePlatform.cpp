@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "testing/FakePlatform.h"
 
 #include "service/vocabulary/TarnReportingPlatform.h"

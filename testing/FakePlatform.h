@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakePlatform: a whole platform of fakes, installed for as long as it lives. A test's fixture holds one.
 //
 // At its end, work that never ran and replies that never came are destroyed while the facilities are still there, then

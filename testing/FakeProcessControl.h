@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeProcessControl: keeps the exit statuses asked for; the process goes on. Threads: one at a time.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeProcessEnvironment: variables that no process sees. Threads: one at a time.
 #pragma once
 

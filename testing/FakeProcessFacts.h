@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeProcessFacts: facts that a test sets. Threads: set before use.
 #pragma once
 

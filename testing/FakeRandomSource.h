@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeRandomSource: gives the numbers that a test put in, then 0 for ever. Threads: one at a time.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeSignposts: keeps the signposts that were set while a test has it record. Threads: any.
 #pragma once
 

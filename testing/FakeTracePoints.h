@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeTracePoints: keeps the trace points that were emitted. Threads: any.
 #pragma once
 

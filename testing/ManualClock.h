@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ManualClock: a clock that stands still until a test moves it.
 //
 // It starts in the middle of 2025 with an hour of uptime, so that no reading is 0 by accident. Threads: any; moving it

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ManualConditions: conditions that never sleep. What happens while somebody waits is told by the test.
 //
 // Without a hook every wait times out at once. With one, each wait unlocks the condition, calls the hook and locks it

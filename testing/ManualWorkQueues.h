@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ManualWorkQueues: serial queues that run when told, on the time of a ManualClock.
 //
 // All work of all queues runs on the thread that calls a run operation, in the order in which it was handed over. While

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RecordingLog: a log that keeps every entry. It starts with the threshold Debug, so that a test sees every line.
 //
 // Threads: any.

@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
 """Prints how much of the portable floors the tests reached, what lacks most first, and fails below the bars.
 
 Counted by the source: a line counts when something on it ran, a branch for each of the two ways of a condition. Reads

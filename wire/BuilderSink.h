@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // BuilderSink: the sink of a PropertyListReader that makes finished containers. Internal to wire/.
 //
 //   {"a": 1, "b": [2, 3]}    add("a", 1)  begin()  add(2)  add(3)  endArray("b"), which joins the array under "b"

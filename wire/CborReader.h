@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // CborReader: walks over the bytes of a frame, one item head at a time. Internal to wire/.
 //
 // A head is the first byte of an item (three bits of major type, five of information) and the argument after it. The

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Encoder: appends frames to a growing buffer that the owner writes out and clears when it likes.
 //
 // What it writes is canonical: the shortest integers and lengths, definite lengths, a float as 32 and a double as 64

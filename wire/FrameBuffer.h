@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FrameBuffer: cuts a received byte stream into frames without copying them.
 //
 // Which problem: frames come in pieces or many at a time, and a peer may announce a large one and never send it. How:

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Operation: what a client can ask for, and the errors that the wire itself answers with.
 //
 // A frame is its length and one CBOR array; docs/wire.md shows some in hex:

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // PropertyListReader: reads checked property-list values out of a frame and hands them to a sink, in one pass. Internal
 // to wire/.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ReplyDecoder: turns one frame from the service into a reply. The client's side of the wire.
 //
 //   [7, null, true]                                  id 7, no error, one result

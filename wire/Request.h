@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Request: what one request asks for, as plain data. Which members count depends on the operation.
 //
 //   frame -> RequestDecoder -> DecodedRequest -> dispatcher -> the remote interface's operation       the service

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RequestDecoder: turns one frame into a checked request. The border between untrusted clients and the service: what
 // comes out of here needs no further checks.
 //

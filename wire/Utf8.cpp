@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "wire/Utf8.h"
 
 namespace tarn::wire {

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The UTF-8 check. Nearly all texts of messages are ASCII, so that case is inline and takes eight bytes at a time.
 //
 //   bytes of a character                    stands for

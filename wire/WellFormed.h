@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Whether bytes are well-formed CBOR, whatever they mean. Asked only about frames that were found wanting, to tell
 // whether they can be answered. Internal to wire/.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Actions and streams as text, for who wants to see what is reported.
 #pragma once
 

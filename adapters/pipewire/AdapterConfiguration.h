@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The adapter's configuration file: TOML, looked at whole before anything is done. What isn't known is refused.
 //
 // Threads: any. docs/pipewire.md lists the keys.

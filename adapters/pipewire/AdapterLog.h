@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The adapter's log: lines on stderr, which the service manager keeps.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The command line of tarnreporting-pipewire. Parsing looks at no file and changes nothing.
 #pragma once
 

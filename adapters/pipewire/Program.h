@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Program: tarnreporting-pipewire at work: PipeWire's loop, the book, and who is told.
 //
 // It comes to PipeWire as soon as there is one and again when it went, in pauses that grow to four seconds. Owned by

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reporter: carries out the StreamBook's actions through the C client.
 //
 // The client connects by itself, keeps sessions over a restart of the service, and holds messages meanwhile. What it

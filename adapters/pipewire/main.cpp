@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // tarnreporting-pipewire: options, configuration, then the program. docs/pipewire.md is its manual.
 #include <pipewire/pipewire.h>
 

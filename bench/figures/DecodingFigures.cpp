@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What it costs to decode and check one message, beside a walk that only reads heads and lengths, and beside two
 // libraries; and to encode it.
 #include <nlohmann/json.hpp>

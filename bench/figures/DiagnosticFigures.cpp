@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the diagnostic workers add to the intake of a message that none of them wants, which is nearly every one: all
 // together and each alone, on an internal build with all of their settings on. In this process.
 #include <algorithm>

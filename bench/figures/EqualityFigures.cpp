@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The comparison of the redundancy test: whether two messages say the same, leaving out when they were sent.
 #include <algorithm>
 #include <array>

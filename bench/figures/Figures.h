@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The figures: each measures ours and its peers in turns and adds its rows to the table.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Many clients with some sessions each, both events of every message recorded.
 #include <sys/epoll.h>
 #include <unistd.h>

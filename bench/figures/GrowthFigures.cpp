@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Whether a message costs the same in a long session as in a short one. In this process, with the real workers and an
 // analytics service that wants nothing.
 #include <malloc.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // How often the service and the posting library wake up while 50 rings are open and nothing is posted.
 #include <unistd.h>
 

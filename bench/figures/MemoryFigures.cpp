@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What a logged message costs in resident memory, in a session of a million different ones.
 #include <malloc.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the mirror of sessions in the real-time-communication reporting service costs: the hand-over of a message, the
 // stop of a long session, and what a thousand live sessions hold.
 #include <array>

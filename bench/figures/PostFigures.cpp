@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What posting to a shared ring costs the thread that posts, whatever becomes of the service, beside a tracepoint of
 // the same fields, and what a message from a ring costs the service.
 #include <sched.h>

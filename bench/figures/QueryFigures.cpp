@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What it takes to ask a full store: a range of time, a session, and a name that is rare.
 #include <sqlite3.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Both events of every message recorded, until the last is safe on the disk.
 #include "bench/Measure.h"
 #include "bench/ServiceReceiver.h"

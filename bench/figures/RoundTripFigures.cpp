@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // One message and its reply at a time: on one processor, where it is all work and no waking of another processor, and
 // where the scheduler puts the processes.
 #include "bench/Measure.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the signposts of the performance traces cost: while nothing records, which is nearly always, and while a trace
 // does. In this process.
 #include <memory>

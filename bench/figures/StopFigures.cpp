@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the stop of a session costs, by the number of messages that it logged: sorting, deriving, taking in what was
 // derived, the summary file and the release of the log. In a process of its own for each figure, with the real workers
 // and an analytics service that takes every event and drops it.

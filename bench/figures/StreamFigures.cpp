@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Many messages under way at once, a reply to each: how many a second, and what one costs the receiving process.
 #include "bench/Measure.h"
 #include "bench/ServiceReceiver.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What it takes to look at what was recorded: a report over many sessions, and at a full store the list of sessions,
 // one of them, and the events of the last hour. Each from the start of the program to its end.
 #include <fcntl.h>

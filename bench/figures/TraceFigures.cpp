@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the end of a traced session costs: reading and evaluating a trace that is nearly as large as one may be, and
 // writing its perf-data file. In this process, with the analysis library that was built with it.
 #include <array>

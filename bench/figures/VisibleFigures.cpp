@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // How soon a message that was sent is seen by whoever follows the store, and how soon it is known to be on the disk.
 #include <fcntl.h>
 #include <poll.h>

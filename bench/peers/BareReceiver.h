@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // BareReceiver: the limit that the socket itself sets. A process that takes frames of our sizes in large gulps, answers
 // each with as many bytes as the service does, and looks at nothing but the lengths.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // BusReceiver: the peer on sd-bus. A service of libsystemd on a private connection, without a broker, with one method
 // that takes the same dictionary as a{sv}, reads all of it and answers.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SqliteAlone: the limit of recording: the recorder's rows, their texts formed beforehand, in SQLite with nothing else
 // around it, 1000 rows a synchronous commit.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // VariantMap: a message as most programs would keep it, a map from text to variant. A peer for memory and equality.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Between the values that owners of a client see and those of the wire. Stateless. Threads: any.
 #pragma once
 

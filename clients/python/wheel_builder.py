@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Makes the wheel of this package with the standard library alone: `pip install ./clients/python` downloads nothing."""
 
 import base64

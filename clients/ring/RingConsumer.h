@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RingConsumer: the reading side of a ring. Copies each record out of the shared memory before anybody looks at it, so
 // that what is checked is what is used, and believes nothing that the writer wrote.
 //

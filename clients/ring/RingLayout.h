@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* RingLayout: where things stand in the memory that a client shares with the service. Plain C, for both sides.
  *
  *   [header, one page][data area, a power of two]

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RingProducer: the writing side of a ring. Puts records into the shared memory and publishes them by one store, so
 // that a thread that stops or dies in the middle has published nothing.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SharedWords: how producer and consumer of a ring touch its memory. A test gives them another one that stops at each
 // of these steps.
 //

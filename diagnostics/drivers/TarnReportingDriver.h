@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingDriver: names one group of driver report channels; either name may be missing, which matches any.
 //
 // A value that never changes. Threads: any.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingDriverUtility: samples what the audio drivers count and tells a session what they counted while it ran.
 //
 // Use: getSnapShot when a session starts, sendDriverLogsForSession when it stops. The difference between the two goes

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingIOChannelSubscription: the subscription to the report channels of one driver group.
 //
 // Plain data, filled by TarnReportingDriverUtility and not changed afterwards.

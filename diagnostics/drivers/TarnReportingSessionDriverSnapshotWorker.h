@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionDriverSnapshotWorker: brackets a session with two samples of what the audio drivers count, and at
 // its stop sends the difference into the same session.
 //

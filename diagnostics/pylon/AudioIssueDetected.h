@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // AudioIssueDetected: the metric record of one detected audio issue: what kind, on which node, for which
 // real-time-audio client, how long, and when.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "diagnostics/pylon/CityHash64.h"
 
 #include <bit>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // CityHash64: the 64-bit string hash behind a metric record's hash value, in its second published form, the one with
 // three seed constants and one multiplier (the first form has a fourth seed and other results for most lengths).
 //

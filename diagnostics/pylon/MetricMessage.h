@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // MetricMessage: what every metric record can do: read itself from the wire, write itself to it, render itself as text.
 //
 // The order of the virtual operations is fixed: destructor, readFrom, writeTo, formatText. A base that is compiled

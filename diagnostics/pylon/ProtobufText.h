@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ProtobufText: a text rendering for people, in the text format that the Protocol Buffers tools read and print:
 //
 //   AudioIssueDetected {

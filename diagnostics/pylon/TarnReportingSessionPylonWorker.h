@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionPylonWorker: posts one metric record for every message about a detected audio issue, as it
 // arrives, to the wireless-diagnostics metric service.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TextFields: a text rendering as a dictionary, for a metric service that wants the fields one by one. The name of the
 // object is left out; strings are taken as they are.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TextFormatter: where a metric record puts its text rendering, one field after the other.
 #pragma once
 

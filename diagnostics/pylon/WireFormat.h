@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The Protocol Buffers wire format, as far as metric records need it.
 //
 // A field is a tag and a value. The tag is a varint: the field's number times 8, plus how its value is laid out. A

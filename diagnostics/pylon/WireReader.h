@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // WireReader: reads values of the Protocol Buffers wire format from bytes that lie somewhere else and outlive it.
 //
 // Input comes from anywhere, so nothing is believed. Once something failed the reader stays failed; a read that fails

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // WireWriter: puts fields into bytes of the Protocol Buffers wire format (see WireFormat.h).
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionSnareWorker: watches a session's messages for known audio faults and, once one has been seen
 // often enough, has the device's bug-capture service capture diagnostics. On internal builds only.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSnareOperations: the class operations of the Snare worker, in a place that its instances may know too:
 // what a request to the capture service is made of, and what a reply says.
 //

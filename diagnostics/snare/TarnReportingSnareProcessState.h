@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSnareProcessState: what the Snare worker's fault detectors remember across sessions.
 //
 // Some faults show only over many short sessions, so their counts belong to the process. One shared instance, made by

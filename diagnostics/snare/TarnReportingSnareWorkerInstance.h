@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the Snare worker's fault detectors are.
 //
 // An instance looks for one kind of fault in a session's messages. Its class derives from

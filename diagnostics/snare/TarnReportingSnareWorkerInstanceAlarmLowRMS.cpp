@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "diagnostics/snare/TarnReportingSnareWorkerInstanceAlarmLowRMS.h"
 
 #include "diagnostics/snare/TarnReportingSnareOperations.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSnareWorkerInstanceAlarmLowRMS: an alarm that plays at too low a level. The third report of a session
 // begins a capture of a minute, once in the life of the worker; a session that stops sooner cancels it, since an alarm
 // that is over so quickly was heard.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSnareWorkerInstanceHapticLeaks: haptics hardware that was left running. The second report of one, from
 // whichever sessions, makes the device take a snapshot of the logs of the session's processes.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "diagnostics/snare/TarnReportingSnareWorkerInstanceMurmurDestroyRecordQueue.h"
 
 #include "diagnostics/snare/WorkerInstanceState.h"

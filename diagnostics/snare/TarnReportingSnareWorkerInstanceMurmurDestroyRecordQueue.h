@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSnareWorkerInstanceMurmurDestroyRecordQueue: the place of a detector of recording queues that the voice
 // assistant destroys too late. No message is of interest to it, so it counts nothing and never fires.
 #pragma once

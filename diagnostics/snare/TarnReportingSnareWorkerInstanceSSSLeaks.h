@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSnareWorkerInstanceSSSLeaks: a system sound that got stuck in the system sound server. Every report that
 // is no repeat makes the device take a snapshot of the logs of the session's processes, but at most one in 15 seconds,
 // whichever sessions the reports come from.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // WorkerInstanceState: what one fault detector of the Snare worker has counted, when it may fire, and what came of it;
 // with the trigger rule as decisions that take the time.
 //

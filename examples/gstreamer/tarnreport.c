@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* tarnreport: an element that lets a stream of sound pass and reports it: a session for each time that it runs, with
  * the time that it played by the stream's own clock. So durations are right however fast the sink takes the buffers.
  *

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Where the frames go: a device of ALSA, or nowhere at the pace of a clock. */
 #pragma once
 

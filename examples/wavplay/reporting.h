@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* What the player tells the reporting service. All but the opening and the closing is for its real-time thread. */
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* wavplay: plays a sound file and reports what it does. One thread decodes into a ring of frames; the other one, with
  * real-time priority where the system allows it, plays them and reports: it waits for nothing but the output.
  *

@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
 """Plays a WAV file at the pace of a clock, heard by nobody, and reports what it does.
 
 usage: wavplay.py [--volume V] [--route NAME] [--at SECONDS volume=V|route=NAME]... FILE

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // AlsaFlume: what the machine's own sound hardware counts, as driver report channels. It reads the kernel's texts under
 // one folder, /proc/asound on a real device (see AlsaText), and nothing else; no sound device is opened.
 //

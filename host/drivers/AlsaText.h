@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The kernel's texts on a PCM substream, /proc/asound/card*/pcm*/sub*/: its "status" and its "info".
 //
 //   closed                              one word while nobody has it open, else lines "key: value":

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FlumeChannelIndex: finds channels by what they are known by. Looks at names that live elsewhere and don't move: the
 // samples outlive the index and stay as they are, so no name is copied for a look-up.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // parseFlumeFile: the text of one driver's file of report channels.
 //
 //   {"driver": "OxbowFoo<0x12>", "group": "Haptics", "subgroup": "Stats", "channels": [

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FlumeFiles: driver report channels in files, one driver each: the plain files "*.json" of a folder (see FlumeFile).
 //
 // Every reading looks at the folder and the files again, in the order of their names, so drivers may write, replace and

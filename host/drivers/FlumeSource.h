@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FlumeSource: where driver report channels come from on this machine. LinuxFlumeService offers what its sources hold:
 // the files that drivers write (FlumeFiles) and the kernel's own counts (AlsaFlume).
 #pragma once

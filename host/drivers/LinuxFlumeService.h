@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LinuxFlumeService: the driver report channels of all sources as one service.
 //
 // Every look-up and every sample reads the sources again. A channel is known by driver, group, sub-group and name; of

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FileOutput: a log file that others may rotate away: when the file of this name has been renamed or removed, the next
 // line begins a new one. Lines are appended, so that several processes may share the file. Threads: the log's own,
 // after open().

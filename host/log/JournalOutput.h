@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // JournalOutput: log entries to the system journal, as fields:
 //
 //   MESSAGE            the text, with its prefix and all its lines

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LineOutput: log lines to a descriptor: what the standard error stream and a log file have in common.
 //
 // A line is written whole, so that those of several processes that share the descriptor don't mix; one that is cut off

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LogClient: on whose behalf the calling thread works now: the client whose request, or whose connection's beginning or
 // end, is being served. Work that such work hands over to the server queue is that client's too.
 //

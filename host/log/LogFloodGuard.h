@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LogFloodGuard: keeps one client from filling the log with one kind of line.
 //
 // Which problem: each request makes lines, and a client can send a hundred thousand a second. How: the lines of one

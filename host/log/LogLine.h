@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LogLine: how a log entry looks as text: `TIME LEVEL CATEGORY text`, the time in UTC with microseconds. People and
 // programs split lines at the first three blanks, so none of these has one. Threads: any.
 #pragma once

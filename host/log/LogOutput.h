@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LogOutput: where the lines of a queued log go: a descriptor, a file, the journal. It knows a form and a system call;
 // waiting, retries and what is lost are the log's.
 //

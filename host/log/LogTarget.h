@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // openLog: makes the log that a target names. The one place that knows which outputs there are.
 //
 // Threads: one at a time; called once, by HostSetup.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // logPrefixed: the log lines of the host's own parts (loop, listener, connections) in the form of all others: the text
 // stands after the prefix "%25s:%-5d " (module, line). Threads: any.
 //

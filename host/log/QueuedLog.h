@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // QueuedLog: the log sink of the service. Whoever logs leaves the entry here and goes on; a thread of its own writes
 // it.
 //

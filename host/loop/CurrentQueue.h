@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // CurrentQueue: which serial queue's work the calling thread runs now: what `isCurrent()` of a queue answers, and with
 // it the check that bound operations are called on their queue. Used by the queues alone.
 //

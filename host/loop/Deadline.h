@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Deadline: calls somebody when a time is up, whatever all other threads are at.
 //
 // Its thread is made beforehand, so that the time can be set when the system has no more of anything to give.

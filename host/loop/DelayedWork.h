@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // DelayedWork: pieces of work that wait for their moment, earliest first, equal moments in the order in which they
 // came. Owned by a queue or a pool, under its lock.
 //

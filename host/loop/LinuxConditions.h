@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LinuxConditions: condition variables. A wait on the server queue, and work that blocks it on purpose, is told to the
 // watchdog; while a wait lasts, the main loop serves its sockets.
 //

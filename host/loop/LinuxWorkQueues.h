@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LinuxWorkQueues: makes the serial queues of the process. The reporting server queue is the main loop's own; all
 // others share a small pool of threads, which are all alike: the quality of service that is asked for isn't used.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // MainLoop: the one loop of the process. The thread that runs it serves the server queue and waits for the sockets, so
 // that a request and its reply never cross a thread.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // QueueProgress: what the server queue's thread tells the watchdog about itself.
 //
 // Owned by the MainLoop. Written by the queue's thread alone, with no more than a relaxed store a step, which costs

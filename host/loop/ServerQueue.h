@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ServerQueue: the one serial queue on which the whole service runs. MainLoop serves it, on the thread that also waits
 // for the sockets.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ServiceManager: what the process tells the service manager that started it, over the socket that $NOTIFY_SOCKET
 // names. Without one all of it does nothing; that a message didn't arrive isn't told, since the service can't do
 // anything about it.

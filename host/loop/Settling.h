@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // settleWhileShrinking: waits for queues at the end of the process, for as long as they get shorter.
 //
 // Why not one long wait: a queue that a back-end holds would cost all of it at each end, and a long but moving one

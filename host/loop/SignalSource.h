@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SignalSource: SIGTERM and SIGINT as calls on the main loop's thread; SIGPIPE is ignored for the whole process, so
 // that a peer that has gone is an error of the write.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Watchdog: tells the service manager, when it asks for that, that the server queue is alive. A queue that hangs, or
 // that works on and on and lets nobody else have a turn, gets no ping, and the manager restarts the service.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // WorkLane: what one client has waiting on the server queue, in its own order, and how much of its turn is left.
 //
 // Work that is handed over while a scope of the lane lives goes to the lane and not to the queue's own list, so that

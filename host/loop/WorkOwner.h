@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // WorkOwner: for which session the calling thread works now, so that what it hands over to a back-end is known as that
 // session's. Sessions enter themselves; work that they hand over to a queue, or put off, goes on for them: the queues
 // note the number with each piece and enter it while the piece runs, so workers and back-ends needn't think of it.

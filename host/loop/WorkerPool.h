@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // WorkerPool: the few threads that run all serial queues but the server queue.
 //
 // A queue is either idle, or stands once in the pool's line, or is run by one thread, or is suspended: so its work

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LinuxClock: the machine's clocks. Owned by the platform, which outlives all who ask it. Threads: any; no call fails
 // or allocates. The processor's time costs a system call, the others none where the kernel shares its clocks with
 // programs.

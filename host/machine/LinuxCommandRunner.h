@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LinuxCommandRunner: runs commands with /bin/sh, each in a process group of its own, so that a command that must end
 // takes along what it started.
 //

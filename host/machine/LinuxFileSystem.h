@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LinuxFileSystem: the machine's files, for the summary and trace files that the system itself writes. Errors are errno
 // values with the system's text, without the path. Threads: any; the calls block on the disk.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LinuxLocalCalendar: the machine's time zone, as TZ or /etc/localtime tells it when the calendar is made and whenever
 // the C library looks again. Threads: any.
 #pragma once

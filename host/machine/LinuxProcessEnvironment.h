@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LinuxProcessEnvironment: this process's environment variables, which processes that it starts inherit. Keeps nothing
 // itself. Threads: see the interface.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LinuxProcessFacts: facts about processes and the machine, read from /proc and /sys each time they are asked for.
 //
 // Thermal state: the worst of all enabled thermal zones, each measured against its own trip points. At or above a

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LinuxRandomSource: the kernel's random numbers. Keeps no state. Threads: any.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // OverflowFile: the overflow store of a machine with a disk, one file in the state directory.
 //
 // The file has no name from the moment on when it is there, so whatever ends the process takes it along. It is made

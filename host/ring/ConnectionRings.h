@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ConnectionRings: the rings and shapes of one connection, and how their records become requests.
 //
 // The rings of a connection share its part of a turn. A record that can't be handed on now (the owner takes none, or

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Receives bytes with the descriptors that a client may send beside them. Stateless. Threads: any; one socket one at a
 // time.
 #pragma once

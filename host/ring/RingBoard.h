@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RingBoard: all rings of the service: who is looked at, when, and what was counted.
 //
 // While any ring is awake, all are looked at once a turn of the loop, and by one timer where nothing else makes a turn:

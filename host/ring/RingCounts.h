@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RingCounts: what came in through rings and what became of it, counted since the start. A part of the ledger.
 //
 // Owned by RingBoard; written and read on the main loop's thread only.

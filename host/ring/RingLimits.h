@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RingLimits: the bounds on what clients share with the service, and what happens when one is reached.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RingMemory: the memory of a client's ring, checked and mapped.
 //
 // The client is not trusted: its file must be memory that can't shrink (reading a page that is gone would end the

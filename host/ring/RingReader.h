@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RingReader: one open ring: its memory, what was read of it, and how far the recorder has come with that.
 //
 //   taken    -> asked_: on its way through the server queue

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ShapeTable: the shapes that a connection has declared, and how a message of one becomes a request.
 //
 // A shape says once what all its messages share: category, type, sessions, keys and their kinds. Its key list is made

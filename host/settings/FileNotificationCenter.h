@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FileNotificationCenter: the notifications of a NotificationFolder, watched by the main loop.
 //
 // One write to a file is one post, by whatever process, this one included; so is another file taking its name. Each

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // HostConfiguration: the service's configuration file (TOML), read into the structures that use it. What the file
 // leaves out keeps its default there, so no default stands in two places. Unknown keys, wrong types and values outside
 // their range are errors: a setting that is misspelt must not be one that is silently off.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Where the service and its tool find each other when nobody names a place. Both ask here, so they agree.
 //
 // Pure functions of the environment, which current() alone looks at: tests make their own. Nothing is asked of the

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // JsonDefaultsStore: the defaults store as one JSON file a suite or application domain, defaults/SUITE.json.
 //
 //   - A read sees what any process has written: the file is looked at each time and read again when it has changed.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // JsonDeviceProperties: what the device is, from a file that holds one JSON object of properties:
 // {"InternalBuild": false, "haptics": false}. Without a file the device has neither property.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // NotificationFolder: named notifications as files, notifications/NAME: 8 bytes, little-endian, the state word. One
 // write to a file is one post, by whatever process.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // isPlainName: which names stand for files: those of suites and notifications, which come from other programs and must
 // lead nowhere else. Threads: any.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ServiceOptions: the command line of tarnreportingd.
 //
 // Parsing looks at no file and changes nothing, so tests try every line without a service. Threads: one at a time.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The directory that keeps the service's state, made and held for one service. Called at the start, in this order,
 // before anything is opened in it. Threads: any. Nothing is thrown.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The TOML library as this tree uses it: results instead of exceptions, nothing to link, and a fault of its mended.
 //
 // For the sources that read a configuration; it is no small header.

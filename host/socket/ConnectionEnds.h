@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ConnectionEnds: the ends of connections that are under way, and what waits for those that began before it.
 //
 // What a client's end makes, the summaries of its sessions, is made after the client is gone; so who asks whether all

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ConnectionGate: whether requests may be taken now.
 //
 // Requests are not taken while too much work waits on the server queue, while a piece of it waits on purpose, or while

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ConnectionHost: what all connections of the listener share: limits, the ledger, the gate, the turns, what is under
 // way, and the scratch space of decoding. It knows no connection but as one that is open and can be ended.
 //

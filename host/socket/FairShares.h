@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FairShares: whose request is served next, when many connections have some.
 //
 // Which problem: a request can cost a microsecond or a second, and who sends many or costly ones must not hold up the

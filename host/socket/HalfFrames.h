@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // HalfFrames: which connections wait for the rest of a frame, since when and with how many bytes.
 //
 // A client may stop in the middle of a frame, on purpose or not. What it sent so far takes memory, so it may do so for

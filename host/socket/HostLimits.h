@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // HostLimits: every bound that protects the service from its clients, and what happens when it is reached. Plain data:
 // the configuration sets some of it, tests any.
 #pragma once

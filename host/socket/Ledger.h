@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Ledger: what came in and what became of it, counted since the start. The answer to `status`.
 //
 // Owned by ConnectionHost; written and read on the main loop's thread only.

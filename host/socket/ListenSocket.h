@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ListenSocket: the socket on which clients reach the service: handed over by the service manager, or bound to a path.
 //
 // A path belongs to one service at a time. Who holds the lock on PATH.lock may replace a stale socket file and remove

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // NumbersReply: a reply of many numbers on its way to being bytes. So many may be a millisecond's work, so it is done a
 // piece at a time, aside from what goes out meanwhile.
 //

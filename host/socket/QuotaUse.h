@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // QuotaUse: what one connection takes of its own and its user's quotas.
 //
 // It tells the user's counts of changes only, so that the sum over a user's connections is right without a walk. A

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Quotas: what one connection and one user may have, and the text that says so when there is no more. Honest clients
 // never see it; it is there for those that loop, leak or mean harm.
 //

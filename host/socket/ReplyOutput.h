@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ReplyOutput: the replies of one connection that are not sent yet, as the bytes that go out.
 //
 // It tells the ledger what becomes of each reply: sent when its last byte is with the system, dropped when it never

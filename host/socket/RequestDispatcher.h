@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // dispatchRequest: calls the operation of the exported object that a decoded request asks for, with a reply that finds
 // its way back to the request's connection.
 //

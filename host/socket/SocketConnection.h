@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SocketConnection: one client on the socket. Cuts what it receives into frames, has them decoded, calls the exported
 // object, and sends the replies.
 //

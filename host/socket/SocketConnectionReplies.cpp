@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The replies of SocketConnection: how they are encoded, gathered and sent.
 #include <sys/epoll.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The requests of SocketConnection: what is done with one that was decoded, until its work waits in the lane.
 #include <new>
 #include <utility>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SocketListener: accepts clients and hands each to the delegate as a connection.
 //
 // When the system has no descriptors left, or as many connections are open as may be, it stops accepting for a moment

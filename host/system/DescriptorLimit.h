@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The process's limit of open descriptors. Every connection costs one, a shared ring another, and a process that runs
 // into the limit can accept nobody and open no file either; so the limit is raised first and the connections are held
 // below it.

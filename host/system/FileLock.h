@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FileLock: keeps other processes, and other threads of this one, from writing what they write under the same lock.
 // Held until its end. Waiting is bounded, so that a process that hangs with the lock can't hang us.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FileReplacement: a file that is written beside its place and takes it when it is whole and on the disk, so that
 // whoever reads sees what was there or all of the new. One that doesn't get there leaves nothing.
 //

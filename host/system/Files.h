@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the system's calls on files leave to do by hand. Nothing here keeps a state; descriptors stay the caller's.
 //
 // Threads: any. Each may block on the disk. Nothing is thrown but for want of memory.

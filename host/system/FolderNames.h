@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // folderNames: the names in a folder, bounded both in memory and in time: folders here are written by other programs,
 // and one with a million entries must not hold up who looks into it.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // How the process's heap gives memory back.
 //
 // Which problem: the allocator learns from what is freed. After the first large block it keeps such blocks on the heap,

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // JsonValues: property-list values as JSON text that people write by hand: defaults files, device properties, driver
 // report channels, scripts.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // MemoryReserve: what the process keeps for the moment in which the system has no memory to give, and what it gave up
 // in such moments.
 //

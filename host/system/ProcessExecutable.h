@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What program a process runs, for log lines that must name a peer and for the paths of this one.
 //
 // Threads: any. Asks /proc, so it costs a few system calls and never waits for the process.

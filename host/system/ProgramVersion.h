@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What --version tells: the version, the commit that the source is of, and the identifier that the linker gave this
 // very build, by which its debug symbols are found.
 //

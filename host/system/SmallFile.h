@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // readSmallFile: the content of a file that is expected to be small: settings, driver reports, the kernel's own texts.
 //
 // Threads: any. May block on a disk, but not on what the file is. Nothing is thrown but for want of memory, which the

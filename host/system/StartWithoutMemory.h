@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // StartWithoutMemory: how the process ends when memory is missing before anybody can connect.
 //
 // Which problem: where nobody can catch it, as for the keys that are made before main(), std::terminate() would abort

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The error of a system call as a value, and as the end of a log line.
 //
 // The one place where an errno value becomes text: `Error::code` is the number, `Error::text` the system's words for

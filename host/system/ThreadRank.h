@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Which of the process's threads has a processor first when there are too few.
 //
 // Threads: any; each call is about the calling thread.

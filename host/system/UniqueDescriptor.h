@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // UniqueDescriptor: owns one file descriptor and closes it at its end. What doesn't own one takes an `int`, so a
 // signature tells who closes.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LinuxPerfDataWriters: perf-data files as JSON.
 //
 //   {

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LinuxPerformanceTraceService: records the service's own signposts into trace files, "Audio/Traces/*.json" in the
 // diagnostic logs (see TraceFile). Several traces may run at once, each into a file of its own.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LinuxSignposts: hands the signposts that are set to the traces that record.
 //
 // While nothing records, nobody comes here: the switch is the interface's. While something does, a signpost costs two

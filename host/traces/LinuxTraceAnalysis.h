@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LinuxTraceAnalysis: the trace-analysis library as a shared object (see analysis/TraceAnalysisFactory.h), loaded on
 // the first call and kept. Why one can't be loaded, and descriptions that it refuses, are told in the log.
 //

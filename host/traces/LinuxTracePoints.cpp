@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "host/traces/LinuxTracePoints.h"
 
 #if __has_include(<sys/sdt.h>)

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LinuxTracePoints: each mark is a USDT probe of the provider "tarnkit", where the program was built with sys/sdt.h,
 // and a mark in the performance traces that record. A probe that nobody is attached to is one instruction that does
 // nothing.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SignpostBuffer: what one trace has recorded and not yet written. Bounded: while it is full, what comes is counted and
 // left out, so a slow disk costs the trace events and the service nothing.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TraceFile: a performance trace on the disk, in the trace-event format that Chrome's and Perfetto's viewers open: one
 // JSON object with the events under "traceEvents", each on a line of its own, and what is known of the whole under
 // "otherData".

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TraceRecording: one performance trace, from the start that is asked for to its file.
 //
 // Owner: its session and, while it has work, the traces' thread. Threads: what a session asks for, any; the work, the

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TraceThread: does the work of all traces: carries out what sessions ask for, in their order, and empties the buffers
 // of those that record.
 //

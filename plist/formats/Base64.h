@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Bytes as base64 text (RFC 4648, padded, no line breaks). Stateless. Threads: any.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The binary format of property lists.
 //
 //   "bplist00"

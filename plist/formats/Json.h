@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // JSON text of property-list values, by three policies: compact, sorted and pretty, and such that it reads back equal.
 //
 // Numbers keep their kind: a bool is true or false, an integer has no point, a float or double always reads back as one

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // PropertyList: property-list files, as people and their tools write them, in the XML or the binary format.
 //
 // The bytes are not trusted. Whatever they are, reading ends with a value or with the first fault and its place, and

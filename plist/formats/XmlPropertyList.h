@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The XML format of property lists.
 //
 //   <plist version="1.0">

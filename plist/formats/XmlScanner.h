@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // XmlScanner: the marks of an XML document, one after the other: tags, texts, and what lies between them. It knows no
 // property list. Internal to plist/.
 //

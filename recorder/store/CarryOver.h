@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // CarryOver: brings what can still be read of a file that was set aside into the fresh one, under its own ids.
 //
 // Rows that are as their checksum says are carried, and rows that nothing proves; where a page can't be read it goes on

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Checkpointer: brings the write-ahead log into the database on a thread and a connection of its own.
 //
 // Which problem: what stands in the log is copied and synchronised for tens of milliseconds, once for some megabytes;

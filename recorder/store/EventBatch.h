@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // EventBatch: events in the order of their hand-over, as the clients' thread leaves them for the writer.
 //
 // Which problem: handing an event over must cost next to nothing. Dictionaries come by reference count and the names

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // EventFile: the recorder's database as the one who writes it sees it: open, transactions of appended events,
 // retention, checkpoints, and setting a file aside that can't be used.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What EventFile takes over from a file that was set aside.
 #include <sqlite3.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // GlobPattern: matches event names the way people write file patterns.
 //
 //   *      any characters, none too (dots and slashes are ordinary characters)

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RecorderTime: how many seconds have truly passed while there were recorders on a file, through restarts and whatever
 // anybody does to the wall clock.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "recorder/store/Retention.h"
 
 #include <sqlite3.h>
@@ -328,7 +329,7 @@ int Retention::removeSlice(double now, std::int64_t newest, Deadline deadline, b
 
   std::int64_t fileBytes = 0;
   std::int64_t usedBytes = 0;
-  std::int64_t oldest = newest + 1;
+  std::int64_t oldest = kFirstId;
   code = readSizes(fileBytes, usedBytes);
   code = code == SQLITE_OK ? readOldest(oldest) : code;
   const std::int64_t excess = usedBytes - (limits_.maxBytes - limits_.maxBytes / kReserveShare);

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Retention: which events must go, in steps small enough to fit into a commit.
 //
 // Which problem: the file must stay within its size while events pour in, without a vacuum that would stop everything,

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SessionCheck: compares the rows of runs, sessions, periods and repeated messages with their checksums (SessionSums),
 // in steps as long as one likes. Finalized before its connection closes. Threads: the connection's.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SessionSums: checksums of the rows of runs, sessions, periods and repeated messages, in a table beside them:
 //
 //   row_hashes(id, hash)     id: 4 times the row's, and which table it is in

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SessionTable: runs, sessions and their periods as rows of the recorder's file, written within the transactions of the
 // events, in order with them.
 //

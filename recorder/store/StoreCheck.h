@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // StoreCheck: compares the recorder's rows with their checksums, group by group, in steps as long as one likes.
 //
 // Every id that retention hasn't removed is either there and as it was written, or unproven (its row is there, its

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // StoreLayout: what the recorder's database must be like before anything is written to it: sound pages, and the tables
 // that a recorder makes. Each answers nothing, or what is wrong under SQLite's code for it. Threads: the connection's.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // StoreMigration: brings a file of an older layout to the current one. Owner: the event file. Threads: the writer's.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // StoreReport: whether a recorder's file is whole, looked at from outside: read-only, beside a running service or
 // without one. The same checks that the recorder itself makes, without its remedies: nothing is mended. Threads: any.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // StoreViews: the views by which people read the recorder's file with stock tools; docs/recorded.md tells what each is
 // for. A view that is missing or reads otherwise is made anew when the file is opened, so they may change within one
 // version of the layout. Nothing of ours reads through them. Threads: any.

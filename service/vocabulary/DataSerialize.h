@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // DataSerialize: text forms of a property-list value (a dictionary or an array), for back-ends that need one.
 //
 // The XML is the property-list document type 1.0 with tab indentation; data in base64. Threads: any.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FileNameText: texts of clients as parts of file names. Stateless. Threads: any.
 #pragma once
 

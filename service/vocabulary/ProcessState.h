@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ProcessState: the one home of what belongs to the whole process: the installed facilities, the answers that are asked
 // for once, and whatever a part of the system shares between sessions.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The one logging helper. Every log line of the system has the prefix "%25s:%-5d " (module, line) before its text; a
 // module names itself and its category once, in a logger:
 //

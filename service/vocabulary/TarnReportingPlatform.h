@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The installed facilities: the one way in which the system reaches its platform.
 #pragma once
 

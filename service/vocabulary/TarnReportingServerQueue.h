@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The check that code bound to the server queue makes of its callers.
 #pragma once
 

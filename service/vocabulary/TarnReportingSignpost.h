@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSignpost: the work of a scope, as performance traces show it.
 //
 //   const TarnReportingSignpost signpost(SignpostCategory::Worker, workerClass.name, "start");

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Utilities that the service, the sessions and the workers share.
 #pragma once
 

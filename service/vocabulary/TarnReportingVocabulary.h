@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The vocabulary: categories, types and service types of messages and sessions, their values and their strings.
 //
 // All of it is stateless. The string tables are built once, on first use; lookups take no lock. Threads: any.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // BTAccess: the accessory reader: has the base unit enumerate the earbuds and gathers what it finds.
 //
 // Owner: whoever keeps the registration's state. Threads: the server queue.

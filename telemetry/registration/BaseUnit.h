@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // BaseUnit: enumerates the wireless earbuds of the device and writes what is known of them into the registration info.
 //
 // On a platform without accessory queries it finds no devices. The info's "splunk" holds a dictionary for each

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingRegistrationPublication: a back-end session of the registration's own, and the records that are sent
 // through it once a backend is found.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingRegistrationState: what the registration workers of all sessions share: the accessory reader, what it
 // found last, and when to look and to publish next.
 //

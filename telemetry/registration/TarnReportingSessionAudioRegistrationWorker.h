@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionAudioRegistrationWorker: reports about once a week which wireless earbuds were connected lately,
 // a record for each accessory, to the real-time-communication reporting service.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingQueueSemaphore: a counting semaphore on which a queue waits instead of a thread.
 //
 // What the waiter would do after its wait it hands over as `then`; its queue is suspended until a signal comes or the

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingRtcMirror: the session that an Rtc worker holds in the real-time-communication reporting service, and
 // all that is done to it.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingRtcSummary: folds the messages of a session into one payload, the list of its values under each key.
 //
 //   {route = a; n = 1}, {n = 2}, {route = c}   becomes   {Tarn_Session_Summary_Event = 7; route = a,c; n = 1,2}

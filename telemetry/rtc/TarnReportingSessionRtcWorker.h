@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionRtcWorker: mirrors one session into the real-time-communication reporting service: one session
 // there for each period between start and stop, one event for each message, and at the stop one summary event that
 // folds all of the session's messages together.

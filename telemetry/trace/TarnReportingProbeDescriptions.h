@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The descriptions of a trace's probes, as a property-list file gives them: one dictionary, or an array of them.
 //
 // Threads: the server queue.

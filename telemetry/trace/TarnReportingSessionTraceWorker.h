@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingSessionTraceWorker: measures what happens during a test session. On internal builds a performance trace
 // is recorded from the session's start to its stop; then the trace is analysed and the times of its signpost intervals
 // are written into a perf-data file.

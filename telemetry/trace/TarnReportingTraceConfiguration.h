@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What a client's configuration says about the trace of its session.
 #pragma once
 

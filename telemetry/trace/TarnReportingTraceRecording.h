@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingTraceRecording: one performance trace, from its start to the place of its file, and the waits in
 // between.
 //

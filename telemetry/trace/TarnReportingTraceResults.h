@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingTraceResults: makes the perf-data file of one finished trace. It has two sorts of values, in
 // milliseconds:
 //

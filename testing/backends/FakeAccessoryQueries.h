@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeAccessoryQueries: earbuds that a test lays out. Threads: one at a time.
 #pragma once
 

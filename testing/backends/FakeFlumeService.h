@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeFlumeService: report channels that a test sets. Groups, subscriptions, samples and deltas follow the service's
 // own rules; each step can be made to fail, with an error code or with nothing at all. A subscription may cover fewer
 // channels than were asked for; samples of it hold those of its channels that the caller names.

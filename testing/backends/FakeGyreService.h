@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeGyreService: keeps the requests for a stack-sampling trace. Threads: one at a time.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakePerfDataWriters: result files as lists of what was written. Threads: one at a time.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakePerformanceTraceService: a trace facility that records nothing but makes its callbacks: each step succeeds, and
 // the trace ends up at "/device/traces/1" (2, ...), until a test says otherwise.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakePylonService: a metric service that asks each record for everything and keeps the answers. Threads: one at a
 // time.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeRtcReportingService: a real-time-communication backend that keeps what each session is given, and answers as it
 // is told: with one backend named "fake" until a test says otherwise.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeSnareService: a bug capture that keeps the requests and replies as it is told: with a fresh session identifier
 // ("capture-1", "capture-2", ...) until a test says otherwise.
 //

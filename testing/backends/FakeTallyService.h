@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeTallyService: an analytics-event service that keeps what it is given. Every name is in use until a test says
 // otherwise; payload callbacks are called at once, later or never, and only for names in use.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeTattleService: a bug-filing prompt without a person: it keeps the drafts and completes as it is told.
 //
 // Threads: one at a time; completions as ReplyFaults delivers them.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeTraceAnalysis: an analysis library that finds in every trace what a test put there. Threads: one at a time.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FakeWattlogService: a power log that keeps what it is given. Threads: one at a time.
 #pragma once
 

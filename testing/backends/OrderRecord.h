@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // OrderRecord: one list of what happened in several fakes of a platform, so that a test can hold the order across them:
 // that a line is logged before the request that it announces, say.
 //

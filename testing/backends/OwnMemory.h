@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // OwnMemory: marks what a fake does for itself. What it keeps of a call isn't the memory of the code under test: while
 // one of these lives, no test lets an allocation of this thread fail. Real facilities need none there, and calls that
 // throw nothing have no other way.

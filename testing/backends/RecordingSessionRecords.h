@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RecordingSessionRecords: session records that keep what they are told, each call with the session whose work the
 // thread did then. Fakes of back-ends and the manual queues ask it whose work is being done.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ReplyFaults: how a fake back-end delivers its replies. The one place where replies go wrong on purpose.
 //
 // A fake hands each reply to deliver(), which calls it as the switch says. Held replies are destroyed with this object;

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Numbered messages: sent under load, and looked for in the store one by one afterwards."""
 
 import struct

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """One allocation after the other fails while a client plays a scenario: alone, fifty in a row, and more than the
 service keeps in reserve. So do those of a start and of an end.
 

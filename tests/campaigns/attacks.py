@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """What hostile peers do: each attack is a function of the socket's path, random numbers, a size from 0 to 1 that scales
 what it sets up, and what to call when it has begun. It goes on until its process is ended.
 """

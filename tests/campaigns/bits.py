@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Damage of every kind to every file of the state directory, one at a time; then the service starts. Either somebody is
 told (a line in the log, a refusal), or nothing is missing: every row that was there is there as it was.
 """

@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
 """Fault, attack and load campaigns against the real service. Each prints one line with its figures and its seed.
 
 usage: campaign.py --programs DIR --shims DIR [--list] [--seed N [--fresh]] [--brief] [--keep]

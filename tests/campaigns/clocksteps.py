@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """The wall clock steps by a day, a year, a decade, forward and back, while the service runs and while it doesn't, and
 begins in 1970 now and then. Hardly any time truly passes, so no row has grown old: none may go.
 """

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """What a campaign is given: programs, shims, its time, its random numbers, a folder, and where it tells what failed."""
 
 import os

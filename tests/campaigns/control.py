@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """The campaign's side of the page that it shares with the interposed calls of the service (shim/Control.h)."""
 
 import errno

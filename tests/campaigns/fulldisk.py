@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """The disk is full, over quota, read-only or broken for a while under load, and then it works again: nothing that was
 answered is lost or doubled, and the service goes on by itself.
 

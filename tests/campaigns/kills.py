@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """SIGKILL at random moments while several clients send: what was committed stays, and nothing comes twice."""
 
 import time

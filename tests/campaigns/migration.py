@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """SIGKILL at random moments while the store of an older service is brought to the present layout: the file is the old
 one or the new one, and every event is there as it was. In full with 10^6 events and 100 kills; SECONDS bound it.
 """

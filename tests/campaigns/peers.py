@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """A polite client beside hostile ones: how long it waits for its replies when it is quiet and in each attack, whether
 it loses a message, and how much memory the service takes at the most.
 

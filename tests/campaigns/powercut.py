@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """What a power cut leaves: everything that was written but not yet synchronised may be there, in part or not at all.
 
 The service runs with a journal of its writes (shim/WriteJournal.cpp) while clients send. From the journal the state

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Who has the processors: what is measured comes first, what attacks it stands back.
 
 On a machine that others use as well, root puts service and client ahead of all of them; who isn't root measures what

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """SIGTERM at random moments while several clients send: all that was answered is there, once, and the end is clean."""
 
 import time

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """SIGKILL at random moments to programs that post to rings: each message that a ring's header calls posted is recorded,
 once, and each that it calls dropped is in the ledger."""
 

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """The service is killed or ended and started again while programs post to rings: no call of theirs ever fails, a close
 leaves nothing, what was posted is there, once, but for what a kill may cost."""
 

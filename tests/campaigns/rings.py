@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Programs that post to rings, and the rings themselves as anybody can see them who may look at the program's memory
 files."""
 

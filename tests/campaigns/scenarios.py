@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Twenty short scenarios of one client, each a function of a connected client and the service; each takes whatever
 comes back and ends. They leave no session behind but by the end of their connection.
 """

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """The real service on private directories: started, waited for, killed, and its store read as anybody would."""
 
 import ctypes

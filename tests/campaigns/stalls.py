@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """The disk stalls: now and then a synchronisation takes half a second longer, and somewhere in that or after it comes
 SIGKILL. What came in is bounded by the time that the first of it has waited, so no more than the stall and the usual
 200 ms of it may be lost, and clients are slowed down rather than told that their messages are safe.

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """200 streams a minute of a real PipeWire, for as long as it is given: each has its session, as long as it ran, and
 none stays open. With a session manager that links them, and with the tests' own PipeWire, which has no hardware.
 """

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """One system call after the other fails once, or is short, while a service starts, serves a short script and ends.
 
 The script runs over a store that holds messages already. However the service takes the fault (it may refuse to start,

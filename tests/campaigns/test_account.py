@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """That a campaign would notice: the account of numbered messages, and the image of a power cut."""
 
 import os

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """That the campaign of kills would notice: its look at the store, played on stores that were tampered with."""
 
 import json

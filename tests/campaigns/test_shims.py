@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """The interposed calls do what a campaign asks of them, to a small program of a few lines.
 
 usage: test_shims.py SHIMS

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """That the campaign of system calls tries all: each site at three of its calls, in each way, over all shares."""
 
 import random

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """What the campaigns' own client writes and reads: the bytes of RFC 8949, and replies out of order."""
 
 import socket

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """A client of the service in bytes: the CBOR of property lists, frames, and a connection that waits for its replies.
 
 It shares no code with the programs, so that a fault of theirs isn't its own as well.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Whatever waits has a deadline: a service that is stuck holds nobody up for longer.
 #include <gtest/gtest.h>
 #include <sys/un.h>

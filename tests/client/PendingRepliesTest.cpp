@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Which starts are reported as cancelled, and when.
 #include "client/PendingReplies.h"
 

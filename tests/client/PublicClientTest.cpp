@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The client as an outside program has it: requests, values and replies of the public headers.
 #include <gtest/gtest.h>
 

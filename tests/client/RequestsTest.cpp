@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Each remote operation as it reaches the service, and its result as it reaches the owner.
 #include <gtest/gtest.h>
 

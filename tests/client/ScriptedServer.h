@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ScriptedServer: the service's end of a socket, for the tests of the client library. It answers when the test says so,
 // so that every order of requests and replies can be had.
 #pragma once

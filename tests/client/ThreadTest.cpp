@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The rules of threads and handlers, and use by several threads in turn.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Messages whose shape nobody declared, where no service answers: what the call refuses, and what is remembered.
 #include <string>
 #include <vector>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What posting costs the thread that posts: no allocation, no page fault, and no system call that a filter would see.
 #include <linux/filter.h>
 #include <linux/seccomp.h>

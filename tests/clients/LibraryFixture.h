@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LibraryFixture: a client of the C library with a session, a shape of two keys and a writer.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The C library where no service answers: what its calls say, what they keep, and their bounds.
 #include <sys/wait.h>
 #include <unistd.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the posting library puts into a record, and which texts it takes: at every length where the way of copying or of
 // looking changes.
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The two sides of a ring under every order of their steps that a random schedule finds, the writer's death included.
 #include <gtest/gtest.h>
 

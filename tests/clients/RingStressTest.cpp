@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The two sides of a ring on real threads. Earns its keep under ThreadSanitizer.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Messages that need no shape of the program's, with the real service: reports, and fields of any keys.
 #include <signal.h>
 #include <tarnreporting_reports.hpp>

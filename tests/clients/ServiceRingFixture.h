@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ServiceRing: the C library and the real service, which the test starts.
 #pragma once
 

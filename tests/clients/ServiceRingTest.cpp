@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The C library with the real service: order, deaths, restarts, and what an idle pair costs.
 #include <sys/wait.h>
 #include <unistd.h>

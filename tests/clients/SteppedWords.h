@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SteppedWords: memory in which a test decides who goes on at every single access, and when a store is seen by others.
 //
 // Two actors run on threads of their own, one at a time. At each access of the ring's memory the running one stops, and

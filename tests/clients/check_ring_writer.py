@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Has ring_writer.py, which knows the documents alone, post to the real service, and looks at what was recorded.
 
 usage: check_ring_writer.py TARNREPORTINGD

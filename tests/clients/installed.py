@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Builds programs of others against an installed libtarnreporting: C, C++ and a plug-in, found by pkg-config and by
 CMake; and looks at what the library itself needs and shows.
 

@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
 """Posts messages through a ring, written by docs/ring.md and docs/wire.md alone.
 
 usage: ring_writer.py SOCKET COUNT

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // OutputCapture: an Output whose lines a test reads.
 #pragma once
 

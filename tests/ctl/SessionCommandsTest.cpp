@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The commands about sessions as people run them: the program itself, on a file that SQL made.
 #include <fcntl.h>
 #include <sys/stat.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "tools/ctl/sessions/SessionEvents.h"
 
 #include "tests/ctl/SessionStoreFixture.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SessionMessages: messages for the tests of what is made of them.
 #pragma once
 

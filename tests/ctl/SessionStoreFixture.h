@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SessionStoreFixture: a recorder's file with sessions in it, made by SQL alone, in a state directory of its own. So
 // what reads the file is tested against its tables as they are documented and against nothing that writes them.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Random streams of messages, tidy and wild, through each derivation and through its model.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The rules of combining and of the three walks, written the long way round: whole payloads as maps, every value of
 // every moment worked out by itself. To compare with.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Builders of client messages and readers of derived ones, for the tests of the walks.
 #pragma once
 

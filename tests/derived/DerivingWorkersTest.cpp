@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The volume, input, Lagoon and orientation workers as a session sees them.
 #include "derived/TarnReportingSessionInputMessagesWorker.h"
 #include "derived/TarnReportingSessionLagoonMessagesWorker.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The reader of a message's fields, against looking for each key.
 #include <gtest/gtest.h>
 

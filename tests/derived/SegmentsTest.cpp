@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The comparisons, the bounds and all the labels that the walks share.
 #include "derived/TarnReportingSegments.h"
 

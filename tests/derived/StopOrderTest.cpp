@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What happens at a session's stop, in which order, with every line of it: producers derive, their messages go through
 // the intake and reach the consumers that still run, later producers and the summary's counts take them in, and the
 // file shows all of it.

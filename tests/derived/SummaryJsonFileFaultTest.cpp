@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The summary file on a disk that refuses: each fault is logged once, what was written stays, the session ends as
 // usual.
 #include "tests/derived/SummaryJsonFileFixture.h"

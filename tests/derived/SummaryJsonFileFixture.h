@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A session whose summary file goes to files in memory, at a fixed moment in a fixed zone.
 #pragma once
 

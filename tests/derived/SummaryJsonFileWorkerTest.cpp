@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The worker that writes a stopped session into a file: what is in it, byte for byte, and which sessions have one.
 #include "derived/TarnReportingSessionSummaryJsonFileWorker.h"
 

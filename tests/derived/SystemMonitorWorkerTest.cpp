@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The worker that brings the device's settings into a session.
 #include "derived/TarnReportingSessionSystemMonitorWorker.h"
 

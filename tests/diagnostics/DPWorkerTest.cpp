@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The worker that asks for a trace of the device at an audio overload: which overloads count, what is asked for, and
 // how its settings are read.
 #include "diagnostics/TarnReportingSessionDPWorker.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Which lines of the memory tools are kept, and how they are cut into blocks and entries of the log.
 #include <algorithm>
 #include <map>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Sessions with the memory-log worker, tools that print what a test says, and what the worker logged of it.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The worker that writes the output of two memory tools to the log: who may ask, how often, and how the tools are run.
 #include "diagnostics/TarnReportingMemoryLogLimiter.h"
 #include "tests/diagnostics/MemoryLogFixture.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // One value of each kind, to be put under a key whose reader expects another.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The worker that offers to file a bug report: when it prompts, with what, and when it holds back.
 #include "diagnostics/TarnReportingSessionTattleWorker.h"
 

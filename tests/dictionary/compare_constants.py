@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Compiles the constants and reports for C and C++ as strictly as a client may, and compares the constants and those
 for Python with the numbers and keys of dictionary/messages.toml, read here without the generator.
 

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Plays each example of dictionary/messages.toml against a service of its own and compares what the recorder has then
 with what the table shows: the events of the names that it shows (and of the details, where it shows them), all of them,
 in order and member by member.

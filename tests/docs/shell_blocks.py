@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Pastes every shell block of every document into a shell, as it stands, and looks whether each command succeeds.
 
 A block is a run of lines that are indented by four blanks and begin with a command. Around it is a folder with the

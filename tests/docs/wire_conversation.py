@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Plays the conversation of docs/wire.md against the real service: what it shows as sent is sent, and what it shows as
 received must come, byte for byte.
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What becomes of a client's sessions when its connection ends, and of everybody else's.
 #include <csignal>
 

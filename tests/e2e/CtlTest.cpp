@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // tarnreportingctl's contract with scripts: exit statuses, replies, complaints.
 #include <fcntl.h>
 #include <unistd.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The messages that the service derives when a session stops, from the client's script to the recorder's rows.
 #include <chrono>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What a running service does for those who study faults: the prompt to file a bug report, the trace at an overload and
 // the memory log, each where the device and its settings want it and nowhere else.
 #include <algorithm>

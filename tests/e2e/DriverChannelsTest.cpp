@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What drivers count in their channel files while a session runs, from the files to the recorder's rows.
 #include <filesystem>
 

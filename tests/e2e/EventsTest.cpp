@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // tarnreportingctl events: what the recorder holds, with and without a running service.
 #include <csignal>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The service's log under clients and readers that mean it no good.
 #include <fcntl.h>
 #include <sys/stat.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A session that runs for long: what its messages take of the memory is bounded, and its stop knows all of them.
 #include <filesystem>
 

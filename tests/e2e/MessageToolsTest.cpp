@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // tarnreportingctl lint and explain: what is wrong in a script, and what a name or a key means.
 #include <filesystem>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Issue and haptics messages on their way through the real service into the metric service's and the power log's rows.
 #include <algorithm>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What a client sees and what the recorder gets, operation by operation.
 #include <algorithm>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the recorder's file goes through: damage, retention, patterns; and that the ledger adds up.
 #include <unistd.h>
 

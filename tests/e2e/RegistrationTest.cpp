@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The accessory registration, which declines every session.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The mirror of sessions in the real-time-communication reporting service, with the service's real queues and the
 // recorder in its place.
 #include <csignal>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Settings: the defaults store, the notifications and the device properties, as a running service sees them.
 #include <unistd.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Bug captures that a running service asks for, on internal builds and on others.
 #include <csignal>
 #include <regex>

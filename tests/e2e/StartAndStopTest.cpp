@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // How the service starts, whom it refuses, and what it leaves when it ends.
 #include <sys/socket.h>
 #include <sys/stat.h>

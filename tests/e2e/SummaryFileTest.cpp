@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The summary files that a running service leaves for people.
 #include <sys/stat.h>
 

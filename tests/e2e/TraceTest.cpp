@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Traced test sessions of a running service: the trace, and the perf-data file that its analysis leaves.
 #include <signal.h>
 

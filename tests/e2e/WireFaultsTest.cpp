@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What a client may send that no client library would: each wrong frame is answered or cut off as it must be, and
 // another client, which works all the while, never notices.
 #include <csignal>

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Plays generated files with the example players and compares what the recorder holds with what was played: durations
 to 50 ms, volumes and routes exactly.
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Runs a fuzzer's test function on every file of the folders and files named on the command line, so that the corpus is
 // an ordinary test in every build. Fails when there was nothing to run.
 #include <cstddef>

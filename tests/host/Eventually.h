@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // eventually: polls a condition until it holds or a generous deadline has passed.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // inChild: runs something in a child process, for what a process can do only once (environment, signals).
 #pragma once
 

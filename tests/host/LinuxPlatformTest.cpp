@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What holds between the machine's facilities: pauses, status, and the order of the end.
 #include "host/LinuxPlatform.h"
 

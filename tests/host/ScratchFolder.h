@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ScratchFolder: a folder of its own for each test, removed at the end.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Allocations of the host's own that fail: nothing is lost or left half done.
 #include <gtest/gtest.h>
 #include <sys/epoll.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TemporaryFolder: a folder of a test's own, gone with it; and the few file operations that tests need.
 #pragma once
 

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Tests of tools/lint/bodies.py: where the body of an if and of a loop stands, and what --fix makes of it."""
 
 import os

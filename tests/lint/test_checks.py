@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Tests of the checks in tools/lint: each rule passes what is right and reports what is wrong, and where."""
 
 import os

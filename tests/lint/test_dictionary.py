@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Tests of tools/lint/dictionary.py and of the table that it reads: each rule passes what is right and reports what is
 wrong, and where."""
 

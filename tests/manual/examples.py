@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Runs the shell blocks of every manual page as they stand: those of the programs' help texts too.
 
 usage: examples.py SOURCE BUILD

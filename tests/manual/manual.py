@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Manual pages and completions against the programs: the kept table of options is theirs, every option and command of
 it stands in its page, scdoc takes each page, and the completions offer what comes next.
 

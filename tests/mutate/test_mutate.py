@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Tests of tools/mutate on a project of one folder: what must be caught is, what must survive is told."""
 
 import contextlib
@@ -47,7 +48,7 @@ class Project(unittest.TestCase):
 
     def test_a_survivor_is_told_with_its_place_and_fails_the_run(self):
         self.assertEqual(self.status, 1)
-        self.assertRegex(self.told, r"(?m)^new +survived +#\d+ sums/Sums\.cpp:12: a < b -> a <= b$")
+        self.assertRegex(self.told, r"(?m)^new +survived +#\d+ sums/Sums\.cpp:13: a < b -> a <= b$")
         self.assertRegex(self.told, r"Sums\.cpp:\d+: made\.reserve\(7\); left out")
 
     def test_what_only_a_death_test_comes_by_is_caught(self):
@@ -55,7 +56,7 @@ class Project(unittest.TestCase):
         self.assertNotIn("std::abort(); left out", self.told)
 
     def test_what_no_test_comes_by_is_told(self):
-        self.assertRegex(self.told, r"(?m)^new +not reached +#\d+ sums/Sums\.cpp:32: number \* 3 -> number / 3$")
+        self.assertRegex(self.told, r"(?m)^new +not reached +#\d+ sums/Sums\.cpp:33: number \* 3 -> number / 3$")
 
     def test_what_the_tests_notice_is_caught(self):
         told = [line for line in self.told.split("\n") if line.startswith("new")]
@@ -69,12 +70,12 @@ class Project(unittest.TestCase):
                     self.assertFalse([line for line in told if line.endswith(": " + change)])
 
     def test_constants_of_the_compiler_are_built_one_by_one(self):
-        self.assertRegex(self.listed, r"Sums\.cpp:7 \(built\): 5 -> 0")
-        self.assertNotIn("Sums.cpp:7:", self.told)
+        self.assertRegex(self.listed, r"Sums\.cpp:8 \(built\): 5 -> 0")
+        self.assertNotIn("Sums.cpp:8:", self.told)
 
     def test_what_does_not_compile_is_dropped_and_counted(self):
         self.assertRegex(self.told, r"[1-9]\d* more don't compile")
-        self.assertNotIn("Sums.cpp:8:", self.told)
+        self.assertNotIn("Sums.cpp:9:", self.told)
 
     def test_the_checkout_is_as_it_was(self):
         for name in ("sums/Sums.cpp", "sums/Sums.h"):
@@ -87,7 +88,7 @@ class Project(unittest.TestCase):
         self.accept("[[accepted]]" + entries[0].split("reason")[0] + 'reason = "either of two equal ones"\n')
         status, told = self.mutate("sums", "--only", "Sums.cpp")
         self.assertEqual(status, 1)
-        self.assertRegex(told, r"(?m)^accepted survived +#\d+ sums/Sums\.cpp:12: a < b -> a <= b$")
+        self.assertRegex(told, r"(?m)^accepted survived +#\d+ sums/Sums\.cpp:13: a < b -> a <= b$")
         caught = next(line for line in self.listed.split("\n") if line.endswith("a < b -> a >= b"))
         self.assertEqual(self.mutate("sums", "--only", caught.split()[0][1:])[0], 0)
 

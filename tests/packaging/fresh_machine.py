@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Installs the packages into a fresh Debian 12 tree, boots it and uses the service as the README says: its first client
 starts it through the socket, what it sends is recorded, the service comes back after a crash and after a hang, an
 installation of the packages over themselves keeps the socket, and a purge leaves nothing. What this machine can't do is

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """What is built is hardened, and tells nothing of where it was built: read from the files themselves. And whoever
 builds it in the plain way gets the same, without warnings as errors.
 

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Installs the build into a folder of its own and looks at what came: files, programs, units, the client package."""
 
 import argparse

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Several entries that are set in one step are there as if they had been set one after the other.
 #include <gtest/gtest.h>
 

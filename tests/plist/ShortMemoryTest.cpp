@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What values are when memory is missing in the middle of a change: as they were before it.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The text forms that everything else is put together from: bytes in hexadecimal, moments in UTC.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Random changes to a dictionary beside a slow, obvious model of one: a list of names and texts.
 #include <gtest/gtest.h>
 

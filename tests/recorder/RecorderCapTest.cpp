@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The cap holds for all that the recorder keeps and for the folders that it is told of.
 #include <fcntl.h>
 

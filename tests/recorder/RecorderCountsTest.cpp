@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What a run that was killed had been handed and didn't commit is known to the next one, to the event.
 #include "tests/recorder/RecorderFixture.h"
 #include "tests/recorder/faults/ChildProcess.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The bug-filing prompt and the stack-sampling service as the recorder stands in for them.
 #include "recorder/RecorderGyreService.h"
 #include "recorder/RecorderTattleService.h"

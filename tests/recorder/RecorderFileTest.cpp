@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What becomes of files that can't be used, and of files that go away.
 #include <fcntl.h>
 

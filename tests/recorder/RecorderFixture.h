@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RecorderFixture: a directory of its own, a recorder's options on it, and a second look at the file through SQLite
 // alone.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // How many events may wait at the pace of a slow disk or processor. The fakes hold a call of the disk up while the
 // manual clock is moved, so the recorder measures what the test wants.
 #include <sys/resource.h>

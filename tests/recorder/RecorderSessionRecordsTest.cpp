@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Rows of runs, sessions and periods, and whose event an event is.
 #include "recorder/store/StoreReport.h"
 #include "tests/recorder/faults/ChildProcess.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the recorder does when memory is missing: for an event that is handed over, in the writer, for an answer.
 #include <algorithm>
 #include <fstream>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A hand-over to a back-end is seen in the traces.
 #include "testing/FakePlatform.h"
 #include "tests/recorder/RecorderFixture.h"

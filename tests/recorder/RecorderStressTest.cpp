@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Many threads at once: nothing is lost, each thread's order is kept, and the account is right at any moment.
 #include <atomic>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Builders of the rows that reports are made of. Times are seconds after kStart.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // StoreFile: a recorder's file made by SQL, with the tables that readers know. Threads: one.
 #pragma once
 

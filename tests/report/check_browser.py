@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Has a real browser show reports, light, dark and on paper, and compares what it shows with SQL.
 
 usage: check_browser.py TARNREPORTINGCTL

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Makes reports of made-up stores and holds them against what a page must be: well-formed XML and valid HTML, small,
 alone, accessible; and against SQL: its numbers are those of the file, in the tables and in the pictures.
 

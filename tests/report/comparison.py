@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Compares the tables of a page with the numbers that SQL says."""
 
 import calendar

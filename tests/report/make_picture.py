@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Makes the picture of reports that stands in the documents: plays the examples against a service of its own, has the
 report of all their sessions and that of the music player's made, and a browser show both beside each other.
 

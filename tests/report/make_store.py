@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Makes a recorder's file with sessions in it, as random as the seed says, for tests and measurements of reports.
 
 usage: make_store.py FILE [--sessions N] [--events N] [--days N] [--seed N] [--hostile] [--open]

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """The numbers of a report, straight from the file by SQL: what the page must say."""
 
 import json

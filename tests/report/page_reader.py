@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Reads a report's page as a tree, whether it is the file itself or what a browser made of it."""
 
 import html.parser

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Reads the colours of a PNG file, as far as browsers write them: 8 bits, RGB or RGBA, not interlaced."""
 
 import collections

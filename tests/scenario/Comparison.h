@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Comparison: sets what arrived against what must arrive, and says of each difference exactly what it is.
 //
 // Scripts are played at once, so the events of a back-end are a mixture of what each script leads to. The lines of a

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // How what is missing, extra, different or out of place is told.
 #include "tests/scenario/Comparison.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Expectations: what a script must lead to, as data beside it: NAME.expected.jsonl for NAME.jsonl. One JSON object a
 // line, with the backend, the name, the payload and, where there is one, the detail of an event; the values in the
 // notation of Notation.h. A list of names stands for as many events, alike but for the name.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The files with what is expected: read, refused and written.
 #include "tests/scenario/Expectations.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Notation: how an expected value is set against one that was found, and how one that was found is written down as
 // expected. Values must be equal, members that aren't expected included, but for texts of the form "<...>", which stand
 // for what differs from run to run:

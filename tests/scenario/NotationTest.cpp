@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the notation of expectations stands for.
 #include "tests/scenario/Notation.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // PassReport: what a newcomer wants to know of a pass, and the details for who looks for one.
 #pragma once
 

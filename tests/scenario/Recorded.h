@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Recorded: what the service says about itself, what its recorder holds and the files that it leaves for people.
 #pragma once
 

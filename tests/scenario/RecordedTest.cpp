@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Summary files and replies as events.
 #include "tests/scenario/Recorded.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A temporary directory with expectations in it, and events that arrive.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ScriptPlayer: plays scripts against a service, each in a client process of its own.
 //
 // Threads: one.

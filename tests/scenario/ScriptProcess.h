@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ScriptProcess: one client process: tarnreportingctl playing one script, its output in files of its own.
 //
 // Threads: one.

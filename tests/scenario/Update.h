@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Update: expectations from what arrived. What still holds of the old ones stays as it is, so that a notation that was
 // put in by hand isn't lost.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // New expectations from what arrived.
 #include "tests/scenario/Update.h"
 

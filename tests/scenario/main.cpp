@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // tarnreportingscenario: plays scripts against a fresh service through client processes of their own and compares what
 // arrived with what stands beside the scripts. Exit status 0 only when all of it arrived, in order, and nothing else.
 #include <CLI/CLI.hpp>

@@ -1,4 +1,5 @@
 #!/usr/bin/env bash
+# SPDX-License-Identifier: Apache-2.0
 # Plays the example scripts against services of their own and compares what arrived with examples/*.expected.jsonl.
 # usage: tests/scenario/run.sh [--update] [BUILD_DIR]
 # Three passes: an ordinary device, one with a driver that counts, then an internal build. Each service gets private

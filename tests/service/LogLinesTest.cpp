@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Every line that a client's requests write, whole: category, level, text and order.
 #include "tests/service/ServiceFixture.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Whole sessions with all workers, once with room for every message in memory, once with next to none: what reaches the
 // back-ends, the files and the log is the same, to the last value and in the same order.
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Every remote operation is an interval of the traces, and so is the work that it has done.
 #include <algorithm>
 

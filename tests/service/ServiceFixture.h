@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The whole service front with the real table of worker classes, on a platform of fakes.
 #pragma once
 

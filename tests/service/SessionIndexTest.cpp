@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What all clients' sessions are together, and a client's own: held in step by every way in which a session comes,
 // runs, stops and goes.
 #include "service/TarnReportingSessionIndex.h"

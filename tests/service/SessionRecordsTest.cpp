@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the session records are told of clients' sessions: every road by which one ends; and whose work an event is that
 // reaches a back-end, whichever way it took.
 #include <algorithm>

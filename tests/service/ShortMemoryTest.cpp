@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Whichever allocation of an operation fails: what the service knows of its clients, sessions and messages stays whole.
 #include <algorithm>
 #include <cstddef>

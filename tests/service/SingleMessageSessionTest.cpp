@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The session of the service's own, for messages that come while nothing runs.
 #include "tests/service/ServiceFixture.h"
 

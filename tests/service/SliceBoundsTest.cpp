@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What each piece of long work costs and where exactly it gives way: a bound that moved would let one client hold the
 // others up, or make short work slow.
 #include "session/TarnReportingSessionMessage.h"

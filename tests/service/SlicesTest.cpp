@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Long work in slices: what others may do in between, and that its own client sees no difference.
 #include <numeric>
 #include <random>

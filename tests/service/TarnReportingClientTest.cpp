@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The operations of the remote interface, as a client sees them.
 #include "tests/service/ServiceFixture.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The trace points that a client's requests set: which, in which order, with which argument.
 #include "tests/service/ServiceFixture.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the session records are told of one session, and whose work its workers do.
 #include "session/TarnReportingSessionChronicle.h"
 

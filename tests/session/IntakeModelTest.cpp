@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Random streams of messages, starts and stops beside a slow and obvious model of the same rules.
 #include <algorithm>
 #include <functional>

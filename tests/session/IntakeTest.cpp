@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the session does to a message before any worker sees it.
 #include "tests/session/SessionFixture.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What a session tells of itself in numbers.
 #include <gtest/gtest.h>
 

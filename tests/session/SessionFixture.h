@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A session on a platform of fakes, with a table of worker classes of the test's own.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "session/TarnReportingSessionMessage.h"
 
 #include <sys/syscall.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // In which order a session writes its lines, marks its trace points and changes, and from where it may be called.
 #include <functional>
 #include <thread>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Whichever allocation fails: a session's log stays whole, and its end needs none.
 #include <gtest/gtest.h>
 

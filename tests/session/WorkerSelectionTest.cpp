@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Which workers a session makes, and in which order they start, stop and get messages.
 #include "tests/session/SessionFixture.h"
 #include "tests/session/WorkersOf.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What a session's workers do is seen in the traces.
 #include "tests/session/SessionFixture.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The workers of a session by their kind, in the order of creation.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FailingAllocations: lets allocations of the calling thread fail, by their number since it was made.
 //
 // What a fake keeps for itself (testing/backends/OwnMemory.h) doesn't count and never fails.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // How much memory the program holds, as its allocator tells. What was freed may count for a while when the pieces are
 // small (about 1 KiB), so a test looks for differences that are large beside that.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Where every random test takes its seeds from, so that a failure can be played again.
 //
 //   for (const std::uint64_t seed : testSeeds(1)) {

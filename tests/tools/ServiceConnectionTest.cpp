@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Where tarnreportingctl finds the service, and what it says when it doesn't.
 #include "tools/ctl/ServiceConnection.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Bytes for the tests of the wire: written in hex, as the documents of CBOR write them.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // docs/wire.md tells clients of any language which operations there are: its table is kOperations, row by row.
 
 #include <gtest/gtest.h>

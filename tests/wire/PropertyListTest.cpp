@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What a dictionary argument may hold, rule by rule.
 #include <gtest/gtest.h>
 

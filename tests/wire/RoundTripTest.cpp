@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Random values against an independent peer, and random damage.
 #include <gtest/gtest.h>
 

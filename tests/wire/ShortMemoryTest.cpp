@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What becomes of a frame that memory is missing for.
 #include <gtest/gtest.h>
 

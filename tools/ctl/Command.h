@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Command: what the sub-commands of tarnreportingctl share.
 //
 // Each command adds itself to the command line with its options and its help, and puts what it does into the slot that

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // CommandLine: the commands and options of tarnreportingctl, of which its help, its manual page and its completions are
 // made.
 //

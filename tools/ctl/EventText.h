@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // EventText: a recorded event as a line for people or for programs. Stateless. Threads: any.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // InputFile: a file to read, or standard input for "-". Closes what it opened. Threads: one.
 #pragma once
 

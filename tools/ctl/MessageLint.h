@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // MessageLint: what in a step of a script the service would take and nobody would understand: a number without a name,
 // a value of the wrong kind or unit, a key that nobody reads.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ScriptPlayer: plays a script against the service and prints each reply when it arrives.
 //
 // Each client name of the script is a connection of its own, made at its first line. A line waits for its reply before

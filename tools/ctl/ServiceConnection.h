@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ServiceConnection: the way to the service: where it may be, how long is waited for it, one request and its answer.
 //
 // Complaints are made here, so that every command says the same about a service that isn't there. Threads: one.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SilentLog: for facilities that also return what went wrong: the command says it on stderr, once. Threads: any.
 #pragma once
 

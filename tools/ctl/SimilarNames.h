@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SimilarNames: whether one name is likely another one, mistyped or with another unit.
 //
 // Stateless. Threads: any.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // tarnreportingctl: talks to the reporting service and reads what it recorded.
 #include <CLI/CLI.hpp>
 #include <algorithm>

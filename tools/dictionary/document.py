@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """docs/messages.md: the data dictionary."""
 
 import json

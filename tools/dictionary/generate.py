@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
 """Makes from dictionary/messages.toml what is made from it: the data dictionary, the clients' constants and
 reports, and the table
 that tarnreportingctl looks at.
@@ -27,10 +28,16 @@ MADE = {
 }
 
 
+def licence(path):
+    """The first line of a source; a document has none."""
+    mark = {".md": "", ".py": "# "}.get(os.path.splitext(path)[1], "// ")
+    return f"{mark}SPDX-License-Identifier: Apache-2.0\n" if mark else ""
+
+
 def made(text):
     """The text of each file that is made from this table, by path; raises Fault."""
     table = load(text)
-    return {path: maker(table) for path, maker in MADE.items()}
+    return {path: licence(path) + maker(table) for path, maker in MADE.items()}
 
 
 def main(arguments):

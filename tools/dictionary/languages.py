@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """The constants that clients in C, C++ and Python include."""
 
 import textwrap

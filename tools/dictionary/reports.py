@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """The functions by which clients in C, C++ and Python report without knowing a key."""
 
 import json

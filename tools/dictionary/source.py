@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """dictionary/MessageTable.cpp: the table as tarnreportingctl looks at it."""
 
 import math

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """The table of what can be said, dictionary/messages.toml: read, and held against itself."""
 
 import json

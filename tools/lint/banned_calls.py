@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Calls that this code doesn't make, each with what to use in its place.
 
 A row: what is banned, where it is allowed all the same (path patterns), and the substitute.

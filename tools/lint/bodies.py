@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
 """Where the body of an if, an else or a loop stands. A body that only leaves (return, continue, break, throw) stands on
 the line of its `if`, without braces, when both fit. Every other body has braces and lines of its own.
 

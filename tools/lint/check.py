@@ -1,7 +1,8 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
 """Runs the checks of this folder over the tree and prints what they find, a line each. Exit 1 when there is anything.
 
-usage: check.py [include_graph|banned_calls|bodies|dictionary|seeds|sizes|statics|wording ...]
+usage: check.py [include_graph|banned_calls|bodies|dictionary|seeds|sizes|spdx|statics|wording ...]
 """
 
 import os
@@ -13,11 +14,12 @@ import dictionary
 import include_graph
 import seeds
 import sizes
+import spdx
 import statics
 import wording
 from tree import Tree
 
-MODULES = (include_graph, banned_calls, bodies, dictionary, seeds, sizes, statics, wording)
+MODULES = (include_graph, banned_calls, bodies, dictionary, seeds, sizes, spdx, statics, wording)
 CHECKS = {module.__name__: module.check for module in MODULES}
 
 

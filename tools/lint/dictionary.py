@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """dictionary/messages.toml against the code: each key that the code names is in the table, under a part that has the
 file; each part that an entry names is there, and one of its files knows the key; the numbers are those of the
 vocabulary; and what is made from the table is current.

@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
 """Whether clang-format would leave every C++ file of the tree as it is. With --fix it rewrites those it would not."""
 
 import os

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Who may include whom. The folders are floors: a file looks at its own folder and at those below, never up.
 
 The table here is the rule; the code only reads it. A new folder that no row knows is a finding by itself.

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Random tests take their seeds from tests/support/Seeds.h, so that every failure can be played again."""
 
 import re

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Where state of the process may live: in service/vocabulary/ProcessState.cpp alone.
 
 Elsewhere the product has no mutable variable at namespace scope and no mutable static, in a function or in a class;

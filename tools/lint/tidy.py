@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
 """Runs clang-tidy over the sources that the build compiles, several at once, each only when it has changed.
 
 A source whose text, headers, flags and configuration are those of its last clean run is not looked at again: a stamp in

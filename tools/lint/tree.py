@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """The files that the checks look at, as texts by path, and the means to look at code without its comments.
 
 A check takes a Tree and returns findings, so that its tests can hand it a tree of their own making.
@@ -11,8 +12,8 @@ from dataclasses import dataclass
 
 CXX = (".cpp", ".h")
 SCRIPTS = (".py", ".sh")
-TEXTS = CXX + SCRIPTS + (".hpp", ".md", ".txt", ".cmake", ".toml", ".json", ".jsonl", ".service", ".socket", ".conf",
-                         ".in")
+TEXTS = CXX + SCRIPTS + (".c", ".hpp", ".md", ".txt", ".cmake", ".toml", ".json", ".jsonl", ".service", ".socket",
+                         ".conf", ".in")
 # Seeds of the fuzzers are meant to be wrong.
 RAW = ("fuzz/corpus/",)
 NAMES = ("dev", "run", ".clang-tidy", ".clang-format", ".gitignore")

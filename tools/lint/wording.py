@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """What no file says, whatever its kind: paths of somebody's machine, notes to oneself, stray bytes."""
 
 import re

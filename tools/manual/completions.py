@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Makes the completions of bash, zsh and fish from the programs' own tables (docs/manual/commands.json).
 
 usage: completions.py bash|zsh|fish PROGRAM

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // tarnreportingcommands: prints the commands and options of tarnreportingd and tarnreportingctl as JSON, from the very
 // tables that the two parse with. docs/manual/commands.json keeps it; manual pages and completions are made of that.
 #include <CLI/CLI.hpp>

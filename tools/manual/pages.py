@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Makes the manual pages: of their templates in docs/manual, of the documents that they take parts of, and of the
 programs' own tables of options (docs/manual/commands.json). So each text is written once.
 

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """The survivors that are known, each with its reason, in tests/mutants-accepted.toml:
 
     [[accepted]]

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Builds a folder's mutated sources in build/mutate/FOLDER and links them into copies of its test programs.
 
 The checkout is never written to. The mutated objects stand before all others, so that what inline functions of headers

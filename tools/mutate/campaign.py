@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Runs the mutants against the tests that come by them: the quick ones first, then the slow ones, then all."""
 
 import os

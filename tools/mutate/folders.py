@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Which test programs hold each folder's rules, the folder's own first. Folders are walked with what is below them.
 
 A program's second part is a filter: tests that take long, or that use threads or other programs, come last or are left

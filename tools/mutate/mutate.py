@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
 """Changes the code in small ways, one at a time, and asks whether its tests notice.
 
 All mutants of a folder are built into its sources at once, each behind a question that TARN_MUTANT answers at run time;

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Finds the places of a source where a small change makes a mutant, by clang's syntax tree.
 
 A mutant is a range of one file, what stands there, and what stands there in its place. Those of `built` kind sit where

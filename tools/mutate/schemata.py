@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Writes a source that holds all of its mutants at once: each asks at run time whether it is the chosen one.
 
 Lines stay where they are, so that the compiler's messages name the lines of the original.

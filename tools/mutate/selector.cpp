@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Chooses the mutant that TARN_MUTANT names, before anything else of the program is initialised. With
 // TARN_MUTANT_REACHED, writes there after each test which mutants its code came by and how long it took.
 #include "tools/mutate/selector.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Part of every mutated source, before its first line: which mutant is the chosen one.
 //
 // The build puts it before the source by an option of the compiler, so no source includes it. Neither variable is

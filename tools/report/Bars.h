@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Bars: numbers as lengths. Stateless. Threads: any.
 #pragma once
 

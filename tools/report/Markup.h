@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Markup: writes a page that is HTML and well-formed XML at once, so that a browser and a strict parser read the same.
 //
 // Texts and values of attributes may hold anything: what would be taken for markup is escaped, and what a page may not

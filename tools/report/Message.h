@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Message: what an analytics event says of a message of a session, with its fields by their keys. Whoever looks at
 // sessions goes by this: what counts as an overload, an error or an issue, what the service derived, and when a message
 // happened.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Page: the whole report as one file: HTML that is well-formed XML too, with its style inside, without scripts and
 // without anything from elsewhere. Stateless. Threads: any.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Picture: one inline SVG picture with a title and a description for those who don't see it.
 //
 // Colours are classes of the page's style sheet, so that a picture follows light, dark and print. Places are in units

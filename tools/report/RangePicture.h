@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RangePicture: what is to be seen of many sessions over a range of time.
 //
 // Everything is counted within the range: of a period the seconds that lie in it, of events those that were handed over

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RangeSection: what the page says of many sessions together. Stateless. Threads: any.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ReportMaker: chooses what a report shows and reads it. Stateless. Threads: any.
 #pragma once
 

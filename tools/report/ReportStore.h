@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ReportStore: reads from the recorder's file what a report is made of, all of one moment.
 //
 // Over many sessions the events are passed over once, and only the payloads that can count are brought out. How the

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Rows of the recorder's file as the report takes them: plain data, whoever has read them. Times are epoch seconds.
 //
 // Nothing of them is trusted: names, texts and payloads are what clients sent. Threads: plain data.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Scale: brings values onto an axis of a picture and chooses where the axis has marks. Stateless. Threads: any.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SessionPicture: what is to be seen of one session, made of its rows by a pure function.
 //
 // Which problem: rows tell of changes, a picture shows stretches. Messages are brought into the order of their own

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SessionSection: what the page says of one session: facts, a timeline, its derived segments and driver counters, each
 // picture with a table of the same numbers. Stateless. Threads: any.
 //

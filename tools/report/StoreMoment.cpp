@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "tools/report/StoreMoment.h"
 
 #include <sqlite3.h>

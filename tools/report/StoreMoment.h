@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // StoreMoment: the recorder's file as it is at one moment, for questions about it.
 //
 // The file is opened read-only and may be written meanwhile; it isn't trusted (see

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Style: the page's style sheet: light, dark, and dark on white where it is printed. Constant. Threads: any.
 #pragma once
 

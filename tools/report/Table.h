@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Table: a table of a page, with its caption and its headings. Owner: who writes it. Threads: one at a time.
 #pragma once
 

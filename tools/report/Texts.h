@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Texts: numbers, times and names as the pages say them. Stateless. Threads: any.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Thinning: as much of a lane as a picture and its table have room for. Stateless. Threads: any.
 //
 // A session may hold a million messages, and a page must stay small enough to be read; so what is beyond the bound is

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Timeline: a session's lanes over its time. Stateless. Threads: any.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ScriptLines: the lines of a script that is read as it comes, so that a script of any length needs no more memory than
 // its longest line.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ScriptParser: turns a line of a script into a checked step, or says what is wrong with it and what was expected.
 //
 // A line is one JSON object. "op" is the name of a remote operation, "sleep" or "disconnect"; the operation's arguments

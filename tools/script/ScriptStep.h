@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ScriptStep: one line of a script, checked.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "tools/script/VocabularyNames.h"
 
 #include "service/vocabulary/TarnReportingVocabulary.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // VocabularyNames: the names that a script may write for categories, types and service types.
 //
 // The vocabulary's parsers answer every text, an unknown one with a value that a known name has as well. Here the two

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Graph: the objects of PipeWire that concern audio, as they are now, and what follows for a stream from its links.
 //
 // It keeps what it is told and nothing else. Owned by the StreamBook. Threads: one at a time.

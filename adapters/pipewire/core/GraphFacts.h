@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What PipeWire tells of its objects, as plain data: the events that the model is fed with.
 //
 // Nothing here knows libpipewire, so that tests feed it from recorded dumps. Threads: one at a time.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Who a stream belongs to: the application, and what a session's configuration tells of it.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the configuration decides: who is reported, as what, and what is never told.
 //
 // Made once, before PipeWire is looked at; its defaults are those of the manual. Threads: any, it never changes.

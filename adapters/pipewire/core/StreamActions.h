@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What is to be reported: sessions that begin, messages, sessions that end. What the model makes of PipeWire's events.
 //
 // Plain data. Keys are texts of the program and live for ever. Threads: one at a time.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // StreamBook: turns what happens in PipeWire's graph into what is to be reported of its streams.
 //
 //   events of the graph --> Graph (as it is now) --> StreamBook (what was said of it) --> actions

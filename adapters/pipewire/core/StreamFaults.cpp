@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What goes wrong: cycles that weren't met, errors of nodes and links. A part of StreamBook.
 #include <algorithm>
 #include <utility>

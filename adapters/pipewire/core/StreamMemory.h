@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // StreamMemory: what was said of one stream, in as few words: how its session begins, and how it runs.
 //
 // For a service that starts anew and knows nothing of a stream that has been playing for long. Fed with the actions as

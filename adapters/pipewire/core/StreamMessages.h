@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What is said of a stream, and the messages that say it: pure functions from facts to keys of the data dictionary.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // How loud a node is, in the two scales that people meet.
 //
 // PipeWire keeps factors of the amplitude: 0.125 makes each sample an eighth. Mixers show the cube root of it, since

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "adapters/pipewire/graph/BoundObject.h"
 
 #include <pipewire/extensions/metadata.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // BoundObject: an object of PipeWire's registry that is listened to, as one of several kinds.
 //
 // It keeps the proxy and its listener for as long as it lives, and hands what it is told to the book. Owned by the

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // GraphWatcher: looks at PipeWire and tells a StreamBook what happens there.
 //
 // It binds the registry's clients, devices, links, the default metadata, and the nodes of audio; and the profiler,

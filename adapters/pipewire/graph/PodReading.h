@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What PipeWire packs into PODs, unpacked: volumes, formats, routes, the profiler's cycles.
 //
 // A POD that isn't what it should be gives nothing; nothing is read beyond its size. Threads: any.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What a tracepoint of the same fields costs, for the figure of a post: prints the nanoseconds of half, of 999 of 1000
 // and of all of so many tracepoints at the most, the clock's own part included, and whether somebody recorded them.
 // run_traced.sh sees to that. With a pause of other than 0 microseconds the thread sleeps so long before each burst:

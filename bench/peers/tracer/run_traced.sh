@@ -1,4 +1,5 @@
 #!/usr/bin/env bash
+# SPDX-License-Identifier: Apache-2.0
 # Runs a program while a tracer of our own records its tracepoints, into memory that holds all of them: what is
 # discarded is cheaper than what is kept. Prints what the program prints, nothing when there is no tracer.
 #

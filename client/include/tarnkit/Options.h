@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Options: the bounds of a client, and what a send says of them.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reply: what became of a request.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Request: one of the remote operations with its arguments, ready to be sent as often as you like.
 //
 // Reporter IDs are yours to choose. An ID that nobody knows is no error: the operation answers as if it had worked.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TarnReportingClient: one connection to the reporting service.
 //
 // The owner drives it: there is no thread inside, a reply is read by whoever waits for it. So a call costs one write

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Value, Dictionary and Array: what messages, configurations and results are made of. Plain data that owns itself.
 //
 //   tarnkit::Dictionary message{{"volume", 0.5}, {"muted", false}, {"route", "Speaker"}};

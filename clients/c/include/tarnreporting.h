@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* tarnreporting: reports what audio software does to the reporting service, from threads that must not wait too.
  *
  *   client ---- session (who plays what) ---- shape (what its messages look like)

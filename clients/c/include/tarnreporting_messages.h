@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* What can be said: numbers and keys of messages, each after what it means, a key with its kind, unit
  * and range. docs/messages.md tells who reads and writes them. Constants alone: no library is needed.
  *

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The C functions: arguments and sizes are checked here, the work is the client's.
 #include <cstddef>
 #include <cstring>

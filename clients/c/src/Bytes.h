@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Bytes: a text or a frame that grows. Without the C++ runtime, and so without exceptions: when memory runs out it is
 // marked as failed, and what is appended from then on is left out. Threads: one at a time.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The little of CBOR that this client needs: the heads of items, texts and numbers to write, and the front of a reply
 // to read. Stateless. Threads: any.
 #pragma once

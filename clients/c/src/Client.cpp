@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "clients/c/src/Client.h"
 
 #include <sys/eventfd.h>

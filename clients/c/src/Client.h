@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // tarnreporting_client: what the handles are, and the helper thread that speaks with the service for them.
 //
 // Everything here is under the client's lock but for what a writer's post() touches. The helper holds the lock while it

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Posting of fields: a message whose shape nobody declared. The library declares one for each set of keys and kinds
 // that comes up and keeps it, so that the message is served after a restart of the service like any other.
 #include <cstring>

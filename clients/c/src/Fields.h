@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Keys and values as a program gives them: whether they are in order, and what is said of them. Stateless. Threads:
 // any.
 #pragma once

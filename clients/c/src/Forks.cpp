@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What becomes of the process's clients when it forks: the child closes its copies of their descriptors, so that it
 // doesn't keep a connection open whose owner is gone. Their memory it has not, and their handles are dead.
 #include <pthread.h>

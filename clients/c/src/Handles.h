@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Handles are made and freed without the C++ runtime, which would end the process where memory runs out, and which a
 // program in C needn't have. Their types need a constructor without arguments that doesn't throw. Stateless. Threads:
 // any.

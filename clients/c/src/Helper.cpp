@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The helper thread: connects, says what is new, reads the replies, looks after writers that may not wake the service.
 #include <poll.h>
 #include <sys/types.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Link: the connection to the service: requests out, the fronts of replies in. Never waits. When anything goes wrong it
 // closes itself, and whoever owns it starts again.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the client says of sessions and their shapes.
 #include <cstring>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Whether a text is UTF-8: no stray byte, no overlong form, no surrogate, nothing over U+10FFFF. Bounded by the text's
 // length, and eight bytes at a time where they are ASCII. Stateless. Threads: any.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // tarnreporting_writer and tarnreporting_shape: what the posting thread touches.
 //
 // The writer's own state lies in memory that isn't given to a forked child, and the ring in memory that is shared with

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // tarnreporting.hpp: the C library tarnreporting.h for C++17 and later. A header and nothing else.
 //
 //   tarnreporting::Client client;

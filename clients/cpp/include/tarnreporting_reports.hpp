@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Reports: messages that an engine posts without knowing a key, one operation each. docs/messages.md lists them.
 //
 //   const tarnreporting::Reports reports(session);         // once; throws tarnreporting::Error

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Reports what audio software does to the reporting service.
 
     import tarnreporting

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Client, Session and Shape: the objects that a program works with."""
 
 import asyncio

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """The C library: its structs and functions, as tarnreporting.h has them."""
 
 import ctypes

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """What can be said: numbers and keys of messages. docs/messages.md tells what they mean.
 
 Made by tools/dictionary/generate.py from dictionary/messages.toml: change that, not this.

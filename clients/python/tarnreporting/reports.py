@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """Reports: messages that an engine posts without knowing a key, one method each. docs/messages.md lists them.
 
 Made by tools/dictionary/generate.py from dictionary/messages.toml: change that, not this.

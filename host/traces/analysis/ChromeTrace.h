@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ChromeTrace: the signpost intervals of a file in the trace-event format, ours or another program's.
 //
 // Read are complete events (phase X) and begins and ends (B, E), which are paired by thread, the innermost first: an

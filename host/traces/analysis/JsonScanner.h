@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // JsonScanner: reads a JSON text from its beginning to its end and tells a listener what it meets; nothing is built.
 //
 // Which problem: a trace is one text of 64 MiB with half a million small objects, of which a few members are wanted.

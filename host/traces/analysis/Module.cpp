@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The trace-analysis library: the facility on top of the trace reader and the probes.
 #include <exception>
 #include <memory>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Probes: what somebody wants to know of a trace, described by dictionaries.
 //
 //   {"name": "Tally", "type": "SkeinSignpostIntervalProbe", "subsystem": "sys.oxbow.*", "signpost": "*Tally*",

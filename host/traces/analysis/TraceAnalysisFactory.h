@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TraceAnalysisFactory: how the service gets at the trace-analysis library: one function with C linkage makes the
 // facility as platform/TraceAnalysis.h has it. Service and library come from one build of this tree.
 //

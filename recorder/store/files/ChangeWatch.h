@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ChangeWatch: wakes whoever reads along as soon as somebody writes to a file or beside it under a name that begins
 // with the file's.
 //

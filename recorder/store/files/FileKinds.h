@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FileKinds: what lies beside the recorder's database under the same cap, by kinds: the share of the cap that each has,
 // and how old its files get. Plain data. Threads: any.
 #pragma once

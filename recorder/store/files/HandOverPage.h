@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // HandOverPage: how many events were handed over and committed, in a small mapped file beside the recorder's, which
 // outlives the process however it ends. The next run reads from it how many were lost.
 //

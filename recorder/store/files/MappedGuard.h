@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // MappedGuard: keeps the process alive when a file that it has mapped is cut by somebody else.
 //
 // Which problem: touching a page beyond a file's end is answered with SIGBUS, and SQLite maps the index of its log,

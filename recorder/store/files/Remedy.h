@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Remedy: what helps against a failure of the store. The code of a store's error is SQLite's result code; it alone
 // decides. Threads: any.
 #pragma once

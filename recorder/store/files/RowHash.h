@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RowHash: checksums of recorded rows, against bits that flip on a disk. Not against people.
 //
 // Each step is a bijection of what was hashed so far, so two texts that differ within eight bytes never hash alike.

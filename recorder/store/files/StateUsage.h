@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // StateUsage: what the files beside the recorder's database take of the cap that holds for all of them.
 //
 //   cap = database + its log + index and counts + files set aside + the files that others write

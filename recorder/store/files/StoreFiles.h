@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // StoreFiles: the database and its two companions, the write-ahead log and the log's index, as the file system shows
 // them: whether they can be ours, whether they are still those that were opened, and their new names when they are set
 // aside.

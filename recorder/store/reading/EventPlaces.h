@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // EventPlaces: where in a large file the events lie that a query asks for, without going through all of them.
 //
 // How: kinds and spans are written anew every few hundred events, and blocks of a thousand know their times (see

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // EventReader: reads what the recorder holds, while it is being written or when no service runs.
 //
 // Owner: a tool. Opens the file read-only and keeps no transaction open between two calls, so it never holds the log up

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SessionReader: looks at the sessions that the recorder holds: runs, sessions and their periods. What was handed over
 // on a session's behalf is EventReader's.
 //

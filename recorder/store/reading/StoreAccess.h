@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // StoreAccess: how a tool comes to read the recorder's file, while it is being written or when no service runs.
 //
 // The file isn't trusted: whatever it holds, it stays as it is, nothing that its schema says is carried out beyond

@@ -1,8 +1,11 @@
+// SPDX-License-Identifier: Apache-2.0
 // EventOwner: whose an event is, of which sort, and how much of the file it counts for, as retention sees it.
 //
 // Which problem: an event's texts are shared with others', of other users too, so what it takes on the disk changes
 // with every removal. How: an event counts for what it says, each text in full, as a reader of `events` would see it.
-// That never changes, needs nobody else's rows, and is the same for everybody. Threads: any.
+// That never changes, needs nobody else's rows, and is the same for everybody. The rows of its session count for
+// nobody: a flood of sessions of one small message each leaves less to share.
+// Threads: any.
 #pragma once
 
 #include <cstdint>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // EventRemoval: takes events out of the recorder's file, with all that stands there for them alone.
 //
 // Which problem: an event shares its texts with events up to 2,048 ids after it, its checksum with those of its group,

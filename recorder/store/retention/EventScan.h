@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // EventScan: goes through the rows of the recorder's events as retention sees them: whose, of which sort, how large.
 //
 // Rows are read alone; the texts that they name are asked for once, as neighbours share them. Owner: the retention.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FileAges: since when files that lie beside the recorder's are known, on the recorder's own time.
 //
 // Which problem: what a file says of its age is the wall clock's, and one step of that would make all of them old. How:

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // IdRange: ids of events, told as ranges. Plain values. Threads: any.
 #pragma once
 

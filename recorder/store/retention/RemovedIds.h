@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RemovedIds: which events retention took out of the middle, so that nobody takes them for lost.
 //
 //   recorder_removed(first, last, hash)    hash: over the two, as no event's checksum holds them

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Shares: what each user's events take of the recorder's file, and whose go next.
 //
 // Which problem: with the oldest going first, whoever sends most pushes everybody else's history out. How: the events

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Connection: one SQLite connection. Statements of it are finalized before it closes. Owner: whoever works with the
 // file.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "recorder/store/rows/EventGroup.h"
 
 #include "recorder/store/files/RowHash.h"

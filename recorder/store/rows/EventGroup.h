@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // EventGroup: the checksums of some events with neighbouring ids, and when they were committed, as one row of the table
 // event_groups(first, seconds, hashes).
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // EventTable: where an event goes in the database: a short row of its own, and texts that it shares with others.
 //
 //   event_rows(id, time, kind, payload, cut, session)

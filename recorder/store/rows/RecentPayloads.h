@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RecentPayloads: the payloads of the last events, to find the one that a mirror's payload repeats.
 //
 // A mirror gets a message's payload without its stamp, or as it is; it comes on a queue of its own, so other messages

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Statement: one prepared SQLite statement. Owner: whoever owns the connection, which must outlive it. Threads: those
 // of the connection.
 //

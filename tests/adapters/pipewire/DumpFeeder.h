@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Feeds a book with what pw-dump printed of a machine.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What is said of machines of several kinds, from the property dumps in testdata/: NAME.json, in the form of pw-dump,
 // and NAME.expected.jsonl, each line as it is to be.
 #include <gtest/gtest.h>

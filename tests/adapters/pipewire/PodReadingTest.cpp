@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "adapters/pipewire/graph/PodReading.h"
 
 #include <gtest/gtest.h>

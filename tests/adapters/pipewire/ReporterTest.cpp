@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the reporter does while no service answers. What a service gets is in the tests with real programs.
 #include "adapters/pipewire/Reporter.h"
 

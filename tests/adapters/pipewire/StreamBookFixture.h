@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A book with a player, its client and two sinks, and what it says as lines of a script.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "adapters/pipewire/core/StreamBook.h"
 
 #include "tests/adapters/pipewire/StreamBookFixture.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Allocations: lets allocations of a running program fail, one or several in a row, by their number since the campaign
 // began to count.
 #include <cerrno>

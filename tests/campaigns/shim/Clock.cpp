@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Clock: moves the wall clock of one program by what the control page says. Other clocks and the machine's stay.
 #include <sys/time.h>
 #include <unistd.h>

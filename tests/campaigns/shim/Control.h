@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Control: the page that a campaign and the interposed calls of the service share, by which it says what is to go wrong
 // and learns what did.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Faults: counts the system calls of a program by kind, and lets one of them fail or do half of what it should, or all
 // of some kinds fail for a while. What to do stands in the control page.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Posts numbered messages to rings, one thread each, in bursts with pauses between them, until it is killed or asked to
 // end. Asked to end (SIGTERM) it closes, and says by its status whether any call ever answered something else than done
 // or dropped, or the close left messages.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // WriteJournal: writes down, in their order, what a program does to the files below one folder: made, written, cut,
 // synchronised, removed, renamed. From that a campaign builds what a power cut at any moment could have left.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* Loads a plug-in, runs it and unloads it, again and again. */
 #include <dlfcn.h>
 #include <stdio.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* A plug-in, which its host loads and unloads as it likes. */
 #include <stddef.h>
 #include <tarnreporting_reports.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 /* A program of somebody else: a message and a report, with no service there to take it. */
 #include <stdio.h>
 #include <tarnreporting.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The same with the C++ header.
 #include <cstdio>
 #include <optional>

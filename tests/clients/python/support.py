@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """The package as it lies in the tree, and a real service for the tests that want one."""
 
 import json

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """The package where no service answers: what its calls say, refuse and keep."""
 
 import ast

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """The package with the real service: what is posted is recorded."""
 
 import logging

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Sessions with the driver snapshot worker, on report channels that the test sets.
 #pragma once
 

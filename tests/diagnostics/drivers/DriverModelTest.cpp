@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Random channels through the whole road - two samples, their difference, keys and texts - against a model that does
 // each step the slow and obvious way.
 #include <algorithm>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The worker that brackets a session with two samples of what the drivers count.
 #include <thread>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What driver report channels become: keys, numbers, texts and log lines.
 #include <limits>
 

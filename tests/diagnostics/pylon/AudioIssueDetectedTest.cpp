@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The metric record as a value, its bytes on the wire and its text; how it is read is in AudioIssueReaderTest.
 #include "diagnostics/pylon/AudioIssueDetected.h"
 

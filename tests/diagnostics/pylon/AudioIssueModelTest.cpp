@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Random records and random inputs beside the slow and obvious model of the wire format.
 #include <gtest/gtest.h>
 

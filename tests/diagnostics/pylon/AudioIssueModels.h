@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The metric record's wire format written the long way round, beside the code and without it: bytes are taken from the
 // front one by one, numbers are built bit by bit. And random records and inputs for both.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The metric record against the Protocol Buffers compiler, as an independent decoder and encoder. Many records go
 // through one run of it, as the elements of a list.
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // How the metric record is read: what is forgiven, what is skipped, what is refused.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Sessions with the Snare worker alone, on an internal build of a device with haptics.
 #pragma once
 

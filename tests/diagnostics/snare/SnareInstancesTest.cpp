@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The four fault detectors in whole sessions: what interests them, when they fire, what they ask for and what they log.
 #include "tests/diagnostics/snare/SnareFixture.h"
 

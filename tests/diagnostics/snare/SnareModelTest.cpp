@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Random streams of messages over random sessions and clocks, through the Snare worker and through a slow and obvious
 // model of what it must ask the capture service for.
 #include <map>

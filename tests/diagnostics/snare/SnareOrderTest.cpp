@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What an instance does across the log, the capture service and its state, in order.
 #include <algorithm>
 #include <thread>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Replies of the capture service that are late, never come, come twice, or come when nobody is left.
 #include "tests/diagnostics/snare/SnareFixture.h"
 

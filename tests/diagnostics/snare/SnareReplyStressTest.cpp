@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The worker on the recorder's capture service, whose own queue replies while sessions stop and go. For the
 // sanitizers.
 #include <random>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // When a fault detector fires: the decisions by themselves, and the worker that keeps the rule with instances of the
 // test's own.
 #include <functional>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Where the Snare worker runs and with which instances, and how it reads and writes for the capture service.
 #include "tests/diagnostics/snare/SnareFixture.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // tarnreportingctl report as scripts see it: exit statuses, what it prints, and what becomes of the page's file.
 #include <fcntl.h>
 #include <sys/stat.h>

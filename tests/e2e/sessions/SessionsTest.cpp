@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // tarnreportingctl sessions, show and export: what a real service recorded of its sessions, and a session played again.
 #include <array>
 #include <chrono>

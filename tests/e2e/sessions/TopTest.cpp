@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // tarnreportingctl top as people and scripts see it, beside a real service: idle, busy, gone and back.
 #include <fcntl.h>
 #include <unistd.h>

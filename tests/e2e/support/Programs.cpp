@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "tests/e2e/support/Programs.h"
 
 #include <fcntl.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Programs: runs the real programs as a person or a service manager would, on private directories, and never waits
 // longer than a deadline. Used by the end-to-end tests. Threads: one at a time.
 #pragma once

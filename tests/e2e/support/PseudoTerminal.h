@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // PseudoTerminal: what a program writes to a terminal, and a terminal for it to write to. Threads: one at a time.
 #pragma once
 

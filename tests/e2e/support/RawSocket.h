@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RawSocket: a client that speaks bytes, for what no client library would send. Threads: one at a time.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 #include "tests/e2e/support/ServiceFixture.h"
 
 #include <csignal>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ServiceFixture: a real service on private directories, with the clients and readers that the tests need.
 #pragma once
 

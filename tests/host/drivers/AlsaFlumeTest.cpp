@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The machine's sound hardware as driver report channels, on recorded trees of the kernel's texts.
 #include "host/drivers/AlsaFlume.h"
 

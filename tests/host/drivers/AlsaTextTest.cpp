@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The kernel's texts on a PCM substream.
 #include "host/drivers/AlsaText.h"
 

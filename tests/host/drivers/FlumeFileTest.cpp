@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The text of a driver's file of report channels.
 #include "host/drivers/FlumeFile.h"
 

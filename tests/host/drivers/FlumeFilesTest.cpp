@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Driver report channels in files that appear, change, break and vanish.
 #include "host/drivers/FlumeFiles.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LogFixture: entries and lines for the tests of the log, at a time that stands still.
 #pragma once
 

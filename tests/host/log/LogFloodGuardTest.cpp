@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // One client can't fill the log with one kind of line.
 #include "host/log/LogFloodGuard.h"
 

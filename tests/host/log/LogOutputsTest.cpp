@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Where log lines go: descriptors, files, the journal.
 #include <fcntl.h>
 #include <gtest/gtest.h>

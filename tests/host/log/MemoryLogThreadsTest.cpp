@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The memory log worker on real threads, conditions, pipes and processes: the tools run at once, nothing that they do
 // holds the service up for long, and requests of many sessions never wait for each other.
 #include <gtest/gtest.h>

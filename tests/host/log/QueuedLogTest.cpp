@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The log never blocks whoever logs, keeps what it can and tells what it lost.
 #include "host/log/QueuedLog.h"
 

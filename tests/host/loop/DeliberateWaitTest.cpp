@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The sockets while a piece of work on the server queue waits on purpose; run under ThreadSanitizer as well.
 
 #include <future>

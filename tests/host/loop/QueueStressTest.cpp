@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Queues under many threads at once; run under ThreadSanitizer as well.
 
 #include <gtest/gtest.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RunningLoop: a main loop on a thread of its own, as a test's service process in small.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SteadyClock: the machine's monotonic clock, for tests that run a real loop. Threads: any.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Lanes of the server queue: their order, their turns, and work that gives way.
 #include "host/loop/WorkLane.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Whose work a piece of work is, on every road that it may take; run under ThreadSanitizer as well.
 #include "host/loop/WorkOwner.h"
 

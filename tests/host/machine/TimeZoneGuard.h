@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TimeZoneGuard: puts the process into a time zone while it lives. Zones that are written out ("CET-1CEST,...") need no
 // zone files. Threads: the test's, while no other looks at the time.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ClientRing: a client's side of a ring, which can do everything wrong. Threads: one at a time.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Clients that write what they like into memory that they share with the service.
 #include <random>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RingFixture: a board of rings on a loop that runs, with owners that note what they are asked for.
 #pragma once
 

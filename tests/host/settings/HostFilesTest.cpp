@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The files that the service is given: configuration and device properties.
 #include <gtest/gtest.h>
 

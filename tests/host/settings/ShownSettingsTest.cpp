@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The example configuration file and the operators' document show every setting, with the default that it has.
 #include <gtest/gtest.h>
 

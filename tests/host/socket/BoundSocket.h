@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A socket that listens at a path: claimed and opened to clients in one step, as the service does in two.
 #pragma once
 

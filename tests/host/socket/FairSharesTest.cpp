@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Who is served next: by cost, among users and among their connections.
 #include "host/socket/FairShares.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RecordingService: in place of the service. It notes each request, answers it on the server queue,
 // and can misbehave on demand. It lives in the test process; its fields are touched on the loop's thread, so tests look
 // at them through RunningLoop::onQueue.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What becomes of replies that a client reads late, in parts or never.
 #include "host/socket/ReplyOutput.h"
 

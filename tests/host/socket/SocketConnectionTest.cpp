@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Connections in order: requests, replies, and the end.
 
 #include <filesystem>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Clients that send garbage, stop in the middle, don't read, come in crowds; and a system that has no descriptors left.
 
 #include <sys/resource.h>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SocketFixture: listener, connections and loop over a real socket, with a recording service after them.
 #pragma once
 

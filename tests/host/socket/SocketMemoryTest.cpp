@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What a client sees when memory is missing for its request, for its connection and for its end.
 #include "host/system/MemoryReserve.h"
 #include "tests/host/socket/SocketFixture.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What happens while requests may not be taken.
 
 #include <future>

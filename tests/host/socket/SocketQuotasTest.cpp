@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What a connection and its user may have, half frames, and `settle`.
 
 #include <thread>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // How what a connection's rings ask for stands among its other work and that of other connections.
 
 #include "tests/host/ring/ClientRing.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // How connections share the service: long work gives way to others and not to its own client's next request.
 
 #include "tests/host/socket/SocketFixture.h"

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TestClient: a client over a real socket, plain and blocking, that can misbehave. Threads: one at a time.
 #pragma once
 

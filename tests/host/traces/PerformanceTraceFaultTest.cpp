@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What happens to performance traces at their bounds and when the disk refuses.
 #include <sys/resource.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A trace service on a folder of its own, with a clock that stands still and real threads.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Signposts from many threads while traces start, stop and are let go of; run under ThreadSanitizer as well.
 #include <atomic>
 #include <random>

@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
 """Whether the built program tells its USDT probes, by provider and name.
 
 usage: check_probes.py PROGRAM

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A stranger's program: finds the installed client library, makes requests with values of every kind, and is told that
 // no service listens where none does.
 #include <iostream>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Property-list files written by another program (samples/make_samples.py), in both formats.
 #include <gtest/gtest.h>
 

@@ -1,4 +1,5 @@
 #!/usr/bin/env python3
+# SPDX-License-Identifier: Apache-2.0
 """Writes the property-list files beside it, each in both formats, with the standard library's own writer.
 
 The C++ test that reads them states what they hold.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // ChildProcess: runs a piece of a test in a process of its own, where limits and rights may be changed or the end may
 // come at any moment. It ends with the test's process at the latest.
 //

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // FaultyFiles: files for SQLite whose n-th call of a kind fails once, or so many times, as a disk or a short memory
 // would make it fail, or is held up. While one lives it stands between SQLite and the real files, for every connection
 // that is opened.

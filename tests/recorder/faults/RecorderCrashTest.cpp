@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A process that ends without warning leaves a sound file that holds all that was committed.
 #include <sys/mman.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Damage that SQLite itself doesn't see, and logs that are damaged, cut or gone: each is told, what can be read stays,
 // and no id is given twice.
 #include <sys/stat.h>

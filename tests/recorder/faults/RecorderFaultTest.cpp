@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Disks that fail: full, broken, read-only; each is logged once when it begins and once when it is over.
 #include <fcntl.h>
 #include <sys/resource.h>

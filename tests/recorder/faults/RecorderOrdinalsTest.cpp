@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Every call that the recorder's files take fails once, each in a life of its own: nothing may be lost, doubled or
 // taken for damage.
 #include "tests/recorder/RecorderFixture.h"

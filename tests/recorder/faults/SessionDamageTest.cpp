@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Damage to the rows of runs, sessions, periods and repeated messages that SQLite itself doesn't see.
 #include <random>
 

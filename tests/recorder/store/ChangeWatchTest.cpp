@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Whoever reads along is woken by writes to the file and what lies beside it under its name, and by nothing else.
 #include "recorder/store/files/ChangeWatch.h"
 

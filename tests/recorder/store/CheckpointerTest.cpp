@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The log is brought into the database while commits go on, and what fails is left to the writer.
 #include "recorder/store/Checkpointer.h"
 

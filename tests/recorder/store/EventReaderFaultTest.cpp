@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Files that hold no events of ours: what their schemas and pages say must cost no more than they are worth.
 #include <array>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // How events share their texts, and that nobody sees it.
 #include "recorder/store/rows/EventTable.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Rows of messages that repeat earlier ones, where such are kept.
 #include "recorder/store/StoreReport.h"
 #include "recorder/store/reading/SessionReader.h"

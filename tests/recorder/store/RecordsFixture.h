@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RecordsFixture: a recorder with the record of sessions beside it, and a thread that works for one of them at a time.
 #pragma once
 

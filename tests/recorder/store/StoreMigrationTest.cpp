@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Files of older layouts: each is brought to the present one when it is opened, whole or not at all.
 #include <random>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The views by which people read the store, on a stream as the service hands it over.
 #include <algorithm>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The look-up of the newest message of a kind, when messages lie in pages: what is read back, and what is kept of it.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The bounds of the lists' memory, and who gives way.
 #include <gtest/gtest.h>
 

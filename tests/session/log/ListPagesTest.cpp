@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Pages of a message list: which are read and written when, and what becomes of a list when one can't be read back.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Sorting a list of which a part lies in the store.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A session whose log has no room in memory does what any session does.
 #include <gtest/gtest.h>
 

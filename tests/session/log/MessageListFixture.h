@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Message lists on a platform of fakes: their messages, which are numbered, and what is counted of them.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What a store does to a page's bytes, and what comes of it.
 #include <gtest/gtest.h>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // WatchedStore: hands all on to a fake overflow store, shows each call before it's carried out, and harms single
 // blocks.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The audio-registration worker and the accessories: when it asks for them, and what it notes of them.
 #include "telemetry/registration/BaseUnit.h"
 #include "tests/telemetry/registration/AudioRegistrationFixture.h"

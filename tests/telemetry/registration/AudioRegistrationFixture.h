@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // AudioRegistration: a session with an audio-registration worker on accessories that the test lays out.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The audio-registration worker and the reporting service: which records it sends, and what fails.
 #include "tests/telemetry/registration/AudioRegistrationFixture.h"
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The audio-registration worker's life, and the moments that outlive it.
 #include "tests/telemetry/registration/AudioRegistrationFixture.h"
 

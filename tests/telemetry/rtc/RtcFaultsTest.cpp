@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The Rtc worker on a service that answers late, twice, never, or when nobody is there any more.
 #include <chrono>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // RtcFixture: sessions with an Rtc worker, and what the reporting service was given.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The Rtc worker on the machine's own queues, with completions from other threads at any time; run under
 // ThreadSanitizer as well.
 #include <gtest/gtest.h>

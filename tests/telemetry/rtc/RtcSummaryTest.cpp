@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The summary event: which messages it folds together, and how.
 #include <gtest/gtest.h>
 

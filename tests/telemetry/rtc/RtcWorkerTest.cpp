@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The Rtc worker on a service that answers as it should: what it is told, in which order, and what is logged.
 #include <algorithm>
 

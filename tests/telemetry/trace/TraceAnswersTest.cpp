@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What the trace facility answers: answers that are awaited, missing, late, doubled, wrong or from another thread.
 #include <functional>
 #include <mutex>

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A test session on an internal build, with a trace facility, an analysis library and result files in memory.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What becomes of a finished trace: the values, sums and key variables of the perf-data file, and where it ends up.
 #include "tests/telemetry/trace/TraceFixture.h"
 

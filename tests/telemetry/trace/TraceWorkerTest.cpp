@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The trace worker: which sessions are traced, with what, from when to when.
 #include "tests/telemetry/trace/TraceFixture.h"
 

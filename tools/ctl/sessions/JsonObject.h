@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // JsonObject: one object of JSON, member by member, as the commands print it with --json. Threads: one.
 #pragma once
 

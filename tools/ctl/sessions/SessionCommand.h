@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SessionCommand: what the commands about one session share: the session that is named, and looking it up. Threads:
 // one.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SessionEvents: goes through the events of a session, and tells messages from their repetitions. Threads: one.
 #pragma once
 

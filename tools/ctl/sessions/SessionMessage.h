@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SessionMessage: a message of a session, read back from the analytics event that it became. Stateless. Threads: any.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SessionOverview: what a line tells of a session: its row, its periods and how many overloads it had. Threads: one.
 #pragma once
 

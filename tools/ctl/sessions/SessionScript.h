@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SessionScript: a session as a script that `tarnreportingctl run` plays to the same derived messages.
 //
 // Messages keep their stamps, so what is derived of them doesn't depend on when and how fast they are played; a service

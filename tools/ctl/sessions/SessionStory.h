@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SessionStory: all that `show` tells of one session: who it was, what it did and what became of it. Threads: one.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SessionTable: a session's messages as CSV (RFC 4180), a row each. Stateless. Threads: any.
 #pragma once
 

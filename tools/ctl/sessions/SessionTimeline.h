@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SessionTimeline: what a session did, from its messages: when its output and input ran, on which devices, how loud,
 // and what went wrong. Stateless. Threads: any.
 #pragma once

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // SessionTrace: a session's own timeline as a Chrome trace (JSON), which the usual viewers of traces open: a track each
 // for its periods, its output, its input and its routes, a counter for the volume, marks for overloads and errors.
 // Stateless. Threads: any.

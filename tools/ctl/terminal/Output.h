@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Output: what the program says: results on stdout, complaints on stderr, and how it went by its exit status.
 //
 // A reader that has had enough (`| head`) closes the pipe; then the program is to end without a word, so the callers

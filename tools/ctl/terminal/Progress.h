@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Progress: one line on a terminal's stderr while work takes longer than a second: what is done, how far it is, how
 // long it has taken. The line is taken away at the end. Where stderr is no terminal, or nobody wants remarks, nothing
 // happens.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // StopRequest: how a command that goes on for ever learns that its reader has enough: by a signal, or since nobody
 // reads standard output any more. Neither is a failure.
 //

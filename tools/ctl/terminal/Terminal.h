@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // Terminal: what results are printed on, and how they may look there. Stateless. Threads: one.
 #pragma once
 

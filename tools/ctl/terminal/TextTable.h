@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TextTable: rows in columns, as wide as what stands in them and no wider than the terminal.
 //
 // All rows are held until they are printed. Threads: one.

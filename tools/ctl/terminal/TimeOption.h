@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TimeOption: a moment as people write it on a command line.
 //
 //   2026-11-20 10:00   2026-11-20   -90s   -30m   -1h   -2d   today   yesterday   @1795158000.5

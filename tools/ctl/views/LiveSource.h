@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // LiveSource: looks at the real service and at the real store. The connection to the service is kept over the looks and
 // made anew when it is lost; the store is opened for each look, since another file may have taken its place. Owner: the
 // command. Threads: one.

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TopLoop: takes looks in turn and shows each, until somebody has seen enough. Threads: one.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TopModel: what the live view shows, made of a look and the one before. Stateless. Threads: any.
 #pragma once
 

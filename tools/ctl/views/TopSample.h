@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // TopSample: one look at the service and at its store, and where looks come from. Threads: one.
 #pragma once
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A program whose streams come and go as fast as they can, each once sound has flowed in it.
 //
 //   churner SECONDS

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """A PipeWire of the test's own on a private directory, the service, and the adapter between them."""
 
 import json

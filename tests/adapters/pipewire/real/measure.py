@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """What the adapter costs: asleep beside streams that only play, and while streams come and go.
 
 usage: measure.py PROGRAMS STREAMER [SECONDS]

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A program that plays silence or records, as the tests ask for it: it pauses, and it dawdles in a cycle.
 //
 //   streamer NAME SECONDS [record] [pause=AT,FOR] [dawdle=AT,MILLISECONDS]

@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """PipeWire, the service and the adapter come and go."""
 
 import signal

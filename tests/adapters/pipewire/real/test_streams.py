@@ -1,3 +1,4 @@
+# SPDX-License-Identifier: Apache-2.0
 """What was played and what is recorded of it, with a real PipeWire."""
 
 import os

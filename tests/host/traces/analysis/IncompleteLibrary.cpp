@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // A trace-analysis library that isn't whole: it has no class for probes.
 #include <memory>
 

@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // The library as the service sees it: loaded, looked through for its classes and asked about real traces.
 #include "host/traces/LinuxTraceAnalysis.h"
 

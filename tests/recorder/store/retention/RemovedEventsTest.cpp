@@ -1,3 +1,4 @@
+// SPDX-License-Identifier: Apache-2.0
 // What retention took out of the middle is known as removed, and what stays needs nothing of it.
 #include "recorder/store/retention/RemovedIds.h"
 #include "tests/recorder/store/retention/RetentionFixture.h"
