@@ -111,7 +111,8 @@ TEST_F(SessionRecordsTest, ACreateUnderTheSameIDReplacesWithTheCountsOfThePeriod
   send(client, 7, 1);
   send(client, 7, 1);
   create(client, 7);
-  EXPECT_EQ(callsOf(1), (Calls{"created 1", "started 1", "stopped 1 messages=2 redundant=1", "ended 1 replaced"}));
+  EXPECT_EQ(callsOf(1),
+            (Calls{"created 1", "started 1", "repeated 1", "stopped 1 messages=2 redundant=1", "ended 1 replaced"}));
   EXPECT_EQ(callsOf(2), Calls{"created 2"});
 }
 
