@@ -6,13 +6,6 @@
 
 namespace tarn::linux_host {
 
-namespace {
-
-// So many users are remembered before those that are gone are looked for.
-constexpr std::size_t kKeptUsers = 256;
-
-}  // namespace
-
 FairShares::~FairShares() {
   for (const std::shared_ptr<ShareParty>& party : parties_) {
     party->fresh.clear();
@@ -21,16 +14,19 @@ FairShares::~FairShares() {
 }
 
 std::shared_ptr<ShareParty> FairShares::partyOf(std::uint32_t user) {
-  if (byUser_.size() > kKeptUsers) {
-    std::erase_if(byUser_, [](const auto& entry) { return entry.second.expired(); });
-  }
-  std::weak_ptr<ShareParty>& known = byUser_[user];
-  std::shared_ptr<ShareParty> party = known.lock();
+  std::shared_ptr<ShareParty>& party = byUser_[user];
   if (party == nullptr) {
     party = std::make_shared<ShareParty>(user);
-    known = party;
   }
-  return party;
+  std::shared_ptr<ShareParty> found = party;
+  if (byUser_.size() > usersBeforeForgetting_) {
+    std::erase_if(byUser_, [this](const auto& entry) {
+      const auto& [known, gone] = entry;
+      return gone.use_count() == 1 && gone->credit >= 0 && latelyOf(*gone) == 0;
+    });
+    usersBeforeForgetting_ = std::max(kKeptUsers, 2 * byUser_.size());
+  }
+  return found;
 }
 
 void FairShares::ready(std::shared_ptr<ShareHolder> holder) noexcept {

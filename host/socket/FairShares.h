@@ -38,8 +38,8 @@ struct MessageRate {
   std::size_t messages = 0;
 };
 
-// What one user's connections have in common. Lives as long as any of them; a user that comes back later begins with
-// nothing owed.
+// What one user's connections have in common. Lives as long as any of them, and for as long after that as something is
+// held against the user: closing a connection and opening another one pays no debt.
 struct ShareParty {
   explicit ShareParty(std::uint32_t theUser) : user(theUser) {}
 
@@ -123,8 +123,8 @@ class FairShares {
   // Lets go of those that wait still, who hold the user in whose lines they stand.
   ~FairShares();
 
-  // The user's own, shared by all holders that live; made on first sight. Users that are gone are forgotten now and
-  // then.
+  // The user's own, shared by all holders that live; made on first sight. Users that are gone and owe nothing are
+  // forgotten now and then.
   std::shared_ptr<ShareParty> partyOf(std::uint32_t user);
   // Something came for the holder to do. Cheap when it waits for a turn already.
   void ready(std::shared_ptr<ShareHolder> holder) noexcept;
@@ -155,14 +155,16 @@ class FairShares {
   // Calls visit(party) for each user that has connections, in no order.
   template <class Visit>
   void forEachParty(Visit visit) const {
-    for (const auto& [user, known] : byUser_) {
-      if (const auto party = known.lock()) {
+    for (const auto& [user, party] : byUser_) {
+      if (party.use_count() > 1) {
         visit(*party);
       }
     }
   }
 
  private:
+  static constexpr std::size_t kKeptUsers = 256;
+
   using Holders = std::list<std::shared_ptr<ShareHolder>>;
 
   std::int64_t serveOne();
@@ -176,7 +178,9 @@ class FairShares {
   void leave(const std::shared_ptr<ShareParty>& party) noexcept;
 
   std::list<std::shared_ptr<ShareParty>> parties_;  // the one whose visit it is comes first
-  std::unordered_map<std::uint32_t, std::weak_ptr<ShareParty>> byUser_;
+  std::unordered_map<std::uint32_t, std::shared_ptr<ShareParty>> byUser_;
+  // How many are remembered before those that are gone are looked for.
+  std::size_t usersBeforeForgetting_ = kKeptUsers;
   const ShareParty* served_ = nullptr;
   std::int64_t lately_ = 0;  // of all users together
   // Cost since the last fading, of which fading_ counts how many there were.

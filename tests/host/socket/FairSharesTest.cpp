@@ -243,6 +243,36 @@ TEST_F(FairSharesTest, UsersThatAreGoneAreForgotten) {
     shares_.partyOf(user);
   }
   EXPECT_EQ(shares_.partyOf(7), first);
+  // One that was remembered would have its place still.
+  const std::weak_ptr<ShareParty> gone = shares_.partyOf(1000);
+  for (std::uint32_t user = 2000; user < 3000; ++user) {
+    shares_.partyOf(user);
+  }
+  EXPECT_TRUE(gone.expired());
+}
+
+TEST_F(FairSharesTest, WhoComesBackOwesWhatItOwed) {
+  holder(1, "dear", 1, 100 * FairShares::kQuantum);
+  serve(1);
+  for (std::uint32_t user = 1000; user < 3000; ++user) {
+    shares_.partyOf(user);
+  }
+  EXPECT_LT(shares_.partyOf(1)->credit, 0);
+  holder(1, "back", 1);
+  holder(2, "other", 1);
+  crowded_ = true;
+  serve(1000);
+  EXPECT_EQ(count("back"), 0) << "what was done for it lately still counts";
+  EXPECT_EQ(count("other"), 1);
+}
+
+TEST_F(FairSharesTest, WhoIsGoneIsNotVisited) {
+  const auto here = shares_.partyOf(1);
+  holder(2, "gone", 1, 100 * FairShares::kQuantum);
+  serve(1);
+  std::vector<std::uint32_t> visited;
+  shares_.forEachParty([&](const ShareParty& party) { visited.push_back(party.user); });
+  EXPECT_EQ(visited, std::vector<std::uint32_t>{1});
 }
 
 TEST(FairShares, LetsGoOfThoseThatWaitWhenItEnds) {
