@@ -15,6 +15,7 @@
 
 #include "platform/UniqueFunction.h"
 #include "plist/Dictionary.h"
+#include "plist/PackedBuilder.h"
 
 namespace tarn::platform {
 
@@ -34,6 +35,23 @@ using Reply = UniqueFunction<void(const std::optional<RemoteError>& error, Resul
 using Acknowledge = Reply<bool>;
 // Absent and empty mean the same to the service: every running session.
 using ReporterIDs = std::optional<std::vector<std::int64_t>>;
+
+// Messages that came one after the other, each for the one session that its ID names, and that nobody waits for. They
+// are read from where they came as they are asked for. Threads: the server queue.
+class MessageRun {
+ public:
+  struct Message {
+    const plist::PackedBuilder::Draft* payload = nullptr;
+    std::uint32_t category = 0;
+    std::uint16_t type = 0;
+    std::int64_t reporterID = 0;
+  };
+
+  virtual ~MessageRun() = default;
+  // The next one, which has been received from then on; null when none is left, or others are to have their turn. What
+  // it shows holds until the next call. Nothing is thrown.
+  virtual const Message* next() = 0;
+};
 
 // One object a connection, held by it until it is over. Sessions belong to the connection that made them: only it
 // configures, starts, stops and destroys them. A reporter ID that it has no session under, 0 among them, is no error:
@@ -74,6 +92,10 @@ class TarnReportingServiceProtocol {
   virtual void getAllReporters(Reply<std::vector<std::int64_t>> reply) = 0;
   // Ends the process at once, without a reply and without stopping sessions; what back-ends hold is made safe first.
   virtual void killService() = 0;
+
+  // No remote operation: does with each message of the run what sendMessage() to this one ID does, without a reply. As
+  // work of the server queue, which it is done with when it returns; it returns when the run gives no further message.
+  virtual void sendMessages(MessageRun& run) = 0;
 
   // No remote operations: what the client has now, for whoever bounds that. Threads: the server queue's.
   virtual std::size_t sessionCount() const { return 0; }

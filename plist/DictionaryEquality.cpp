@@ -43,30 +43,30 @@ bool isIgnored(const Key& key, std::span<const Key> ignored) noexcept {
   return std::find(ignored.begin(), ignored.end(), key) != ignored.end();
 }
 
-// Two dictionaries of one key list: ignored values are skipped unseen, equal bytes many at a time, and only the
-// values that hold a difference are looked at.
+// Two values whose bytes differ, though their tags may not.
+bool equalValues(const std::byte* a, const std::byte* b) noexcept {
+  if (Packed::isPlain(a) && *a == *b) return false;
+  return Packed::read(a) == Packed::read(b);
+}
+
+// Two dictionaries of one key list: equal bytes are passed over many at a time, and only the values that hold a
+// difference are looked at, their keys too. Values that are equal byte for byte end together, so a difference lies
+// before either end.
 bool equalWithSameKeys(const Body& a, const Body& b, std::span<const Key> ignored) noexcept {
   const Key* key = a.keys->keys();
   const std::byte* atA = a.data();
   const std::byte* atB = b.data();
   while (atA != a.end()) {
-    if (isIgnored(*key, ignored)) {
-      atA += Packed::sizeAt(atA);
-      atB += Packed::sizeAt(atB);
-      ++key;
-      continue;
-    }
     const auto left = static_cast<std::size_t>(std::min(a.end() - atA, b.end() - atB));
-    if (a.end() - atA == b.end() - atB && std::memcmp(atA, atB, left) == 0) return true;
-    // Values that are equal byte for byte end together, so the difference lies before either end.
     const std::byte* const differing = atA + firstDifference(atA, atB, left);
+    if (differing == a.end()) return true;
     std::size_t size = Packed::sizeAt(atA);
     for (; atA + size <= differing; size = Packed::sizeAt(atA)) {
       atA += size;
       atB += size;
       ++key;
     }
-    if (!isIgnored(*key, ignored) && !(Packed::read(atA) == Packed::read(atB))) return false;
+    if (!isIgnored(*key, ignored) && !equalValues(atA, atB)) return false;
     atA += size;
     atB += Packed::sizeAt(atB);
     ++key;

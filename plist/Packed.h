@@ -106,6 +106,11 @@ class Packed {
   // The value as a view into the block; containers aren't counted for it.
   static ValueView read(const std::byte* at) noexcept;
   static bool isContainer(const std::byte* at) noexcept { return tagAt(at) >= Tag::Array; }
+  // Of a kind whose values under one tag are equal only when all their bytes are: a bool, an integer, a text, data.
+  static bool isPlain(const std::byte* at) noexcept {
+    const Tag tag = tagAt(at);
+    return tag < Tag::Float || (tag >= Tag::Text8 && tag <= Tag::Data32);
+  }
   // Only of a container; null for an empty one.
   static detail::Body* bodyAt(const std::byte* at) noexcept { return load<detail::Body*>(at + 1); }
 

@@ -14,14 +14,14 @@ namespace {
 // Beyond that, entries are set one by one.
 constexpr std::size_t kBytesInOneStep = 128;
 
-// Packed bytes of the entries when they can be added to this block in one step; 0 when they can't.
-std::size_t sizeInOneStep(const detail::Body* body, std::span<const Dictionary::Entry> entries) noexcept {
-  if (body == nullptr) return 0;
+// Packed bytes of the entries when they can be added to a block of these keys in one step; 0 when they can't.
+std::size_t sizeInOneStep(const detail::KeyListBody* keys, std::span<const Dictionary::Entry> entries) noexcept {
+  if (keys == nullptr) return 0;
   std::size_t bytes = 0;
   for (const Dictionary::Entry& entry : entries) {
     const std::size_t size = Packed::sizeOf(entry.value);
     const bool isContainer = entry.value.kind() == Kind::Array || entry.value.kind() == Kind::Dictionary;
-    if (size == 0 || isContainer || detail::indexInKeyList(body->keys, entry.key) != KeyList::npos) return 0;
+    if (size == 0 || isContainer || detail::indexInKeyList(keys, entry.key) != KeyList::npos) return 0;
     bytes += size;
   }
   return bytes <= kBytesInOneStep ? bytes : 0;
@@ -144,31 +144,70 @@ Array PackedBuilder::finishArray() {
   return Array(body);
 }
 
-void PackedBuilder::setEntries(Dictionary& dictionary, std::span<const Dictionary::Entry> entries) {
-  detail::Body*& body = dictionary.body_;
-  const std::size_t bytes = sizeInOneStep(body, entries);
-  if (bytes == 0) {
-    for (const Dictionary::Entry& entry : entries) {
-      dictionary.set(entry.key, entry.value);
-    }
-    return;
+void PackedBuilder::Draft::begin(std::size_t mostBytes) {
+  if (bytes_.size() < mostBytes) {
+    bytes_.resize(std::max(2 * bytes_.size(), mostBytes));
   }
-  detail::OwnKeyList list;
-  for (const Dictionary::Entry& entry : entries) {
-    list.reset(detail::extendKeyList(list ? list.get() : body->keys, entry.key));
+  used_ = 0;
+  keys_ = nullptr;
+}
+
+void PackedBuilder::Draft::add(const ValueView& value) noexcept {
+  std::byte* const to = bytes_.data() + used_;
+  used_ += static_cast<std::size_t>(Packed::write(to, value) - to);
+}
+
+ValueView PackedBuilder::Draft::at(std::size_t index) const noexcept {
+  const std::byte* at = bytes_.data();
+  for (; index > 0; --index) {
+    at += Packed::sizeAt(at);
   }
-  const std::size_t before = body->bytes;
-  if (detail::isShared(body)) {
-    Dictionary copy(copyOf(*body, before + bytes));
-    std::swap(body, copy.body_);
-  } else {
-    body = detail::growBody(body, before + bytes);
-  }
-  std::byte* to = body->data() + before;
+  return Packed::read(at);
+}
+
+Dictionary PackedBuilder::Draft::dictionary() const {
+  if (keys_->empty()) return {};
+  KeyList list = *keys_;
+  detail::Body* const body = detail::makeBody(used_);
+  std::memcpy(body->data(), bytes_.data(), used_);
+  body->keys = std::exchange(list.body_, nullptr);
+  return Dictionary(body);
+}
+
+PackedBuilder::Addition::Addition(const KeyList& keys, std::span<const Dictionary::Entry> entries) : before_(keys) {
+  const std::size_t bytes = sizeInOneStep(keys.body_, entries);
+  if (bytes == 0) return;
+  packed_.resize(bytes);
+  std::byte* to = packed_.data();
+  KeyList list = keys;
   for (const Dictionary::Entry& entry : entries) {
     to = Packed::write(to, entry.value);
+    list = list.appending(entry.key);
   }
-  detail::releaseKeyList(std::exchange(body->keys, list.release()));
+  after_ = std::move(list);
+}
+
+void PackedBuilder::Addition::addTo(Dictionary& dictionary) const {
+  detail::Body*& body = dictionary.body_;
+  const std::size_t before = body->bytes;
+  if (detail::isShared(body)) {
+    Dictionary copy(copyOf(*body, before + packed_.size()));
+    std::swap(body, copy.body_);
+  } else {
+    body = detail::growBody(body, before + packed_.size());
+  }
+  std::memcpy(body->data() + before, packed_.data(), packed_.size());
+  detail::retainKeyList(after_.body_);
+  detail::releaseKeyList(std::exchange(body->keys, after_.body_));
+}
+
+Dictionary PackedBuilder::Addition::addedTo(const Draft& draft) const {
+  detail::Body* const body = detail::makeBody(draft.used_ + packed_.size());
+  std::memcpy(body->data(), draft.bytes_.data(), draft.used_);
+  std::memcpy(body->data() + draft.used_, packed_.data(), packed_.size());
+  detail::retainKeyList(after_.body_);
+  body->keys = after_.body_;
+  return Dictionary(body);
 }
 
 void PackedBuilder::reset() noexcept {

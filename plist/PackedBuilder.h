@@ -38,6 +38,9 @@ class KeyListCache {
 // Throws where memory runs out, as Dictionary does.
 class PackedBuilder {
  public:
+  class Draft;
+  class Addition;
+
   PackedBuilder() = default;
   PackedBuilder(const PackedBuilder&) = delete;
   PackedBuilder& operator=(const PackedBuilder&) = delete;
@@ -58,10 +61,6 @@ class PackedBuilder {
   Dictionary finishDictionary(const KeyList& keys);
   // Closes the open container as an array.
   Array finishArray();
-  // What Dictionary::set() of one after the other does, for who adds the same few entries to every message: when none
-  // of the keys is there yet, the dictionary has entries, and the values are small and no containers, its block grows
-  // once. The keys are all different, and no value looks into the dictionary itself. Needs no builder.
-  static void setEntries(Dictionary& dictionary, std::span<const Dictionary::Entry> entries);
   // Drops everything that is open, for a decoder that gives up in the middle. The scratch space is kept.
   void reset() noexcept;
 
@@ -86,6 +85,63 @@ class PackedBuilder {
   // Of all open containers, the innermost one's last, and the containers themselves.
   std::vector<std::string_view> keys_;
   std::vector<Level> levels_;
+};
+
+// A dictionary that has no block yet: its values lie packed one after the other, so that whoever adds entries to it
+// does so before the one block is made. For decoders, which make one after the other: the space is kept. No value is a
+// container.
+class PackedBuilder::Draft {
+ public:
+  // Bytes that a value takes at most beyond those of its text or data.
+  static constexpr std::size_t kMostValueBytes = 9;
+
+  Draft() = default;
+  Draft(const Draft&) = delete;
+  Draft& operator=(const Draft&) = delete;
+
+  // Begins anew. The values to come take at most so many bytes together.
+  void begin(std::size_t mostBytes);
+  // Adds a value that is present.
+  void add(const ValueView& value) noexcept;
+  // A key for each value, in their order. The list stays for as long as the draft is looked at.
+  void finish(const KeyList& keys) noexcept { keys_ = &keys; }
+
+  // Only of a draft that is finished.
+  const KeyList& keys() const noexcept { return *keys_; }
+  // The value of a key of the list, by its place there. Walks the values before it.
+  ValueView at(std::size_t index) const noexcept;
+  Dictionary dictionary() const;
+
+ private:
+  friend class PackedBuilder::Addition;
+  std::vector<std::byte> bytes_;  // as many as were ever needed
+  std::size_t used_ = 0;
+  const KeyList* keys_ = nullptr;
+};
+
+// The same few entries for dictionary after dictionary of one list of keys, which has none of theirs: what
+// Dictionary::set() of one after the other does, with nothing left to be found out for each. Its block grows once.
+class PackedBuilder::Addition {
+ public:
+  // For no dictionary.
+  Addition() = default;
+  // Entries whose keys are all different, for dictionaries of these keys. For none at all when there is a key of theirs
+  // among those, a value that is absent or a container, or more than is added in one step.
+  Addition(const KeyList& keys, std::span<const Dictionary::Entry> entries);
+
+  // Whether it may be added to this one.
+  bool isFor(const Dictionary& dictionary) const noexcept { return !after_.empty() && dictionary.hasKeys(before_); }
+  bool isFor(const Draft& draft) const noexcept { return !after_.empty() && draft.keys() == before_; }
+  // In place, or in a block of its own where that is shared.
+  void addTo(Dictionary& dictionary) const;
+  // The draft's entries, then these.
+  Dictionary addedTo(const Draft& draft) const;
+
+ private:
+  // The keys before and after, and the values as they stand in the block; nothing is after where it is for none.
+  KeyList before_;
+  KeyList after_;
+  std::vector<std::byte> packed_;
 };
 
 }  // namespace tarn::plist

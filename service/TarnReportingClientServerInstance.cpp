@@ -9,6 +9,7 @@
 #include "platform/TracePoints.h"
 #include "platform/WorkQueue.h"
 #include "service/TarnReportingMessageDelivery.h"
+#include "service/TarnReportingRunDelivery.h"
 #include "service/TarnReportingSessionListing.h"
 #include "service/TarnReportingSlices.h"
 #include "service/vocabulary/ProcessState.h"
@@ -147,6 +148,14 @@ void TarnReportingClientServerInstance::sendMessage(plist::Dictionary message, s
     const auto signpost = operation("sendMessage", {"category", delivery.category()});
     delivery.begin(self->processIdentifier_, self->delegate_);
   });
+}
+
+void TarnReportingClientServerInstance::sendMessages(platform::MessageRun& run) {
+  TarnReportingRequireServerQueue();
+  TarnReportingRunDelivery delivery(processIdentifier_, delegate_.lock());
+  while (const platform::MessageRun::Message* const message = run.next()) {
+    delivery.deliver(*message);
+  }
 }
 
 void TarnReportingClientServerInstance::stopReportingSessionForID(std::int64_t reporterID,

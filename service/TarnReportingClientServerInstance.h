@@ -70,6 +70,8 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
   // without IDs gets the key "sendSingleMessage" (true) on the caller's thread, before anything is queued.
   void sendMessage(plist::Dictionary message, std::uint32_t category, std::uint16_t type,
                    platform::ReporterIDs reporterIDs, platform::Reply<> reply) override;
+  // The same for each message of a run, at once; see TarnReportingRunDelivery.
+  void sendMessages(platform::MessageRun& run) override;
   // Stops this client's session, which stays, then sends the reply that its start left with it, then logs the running
   // sessions, then replies true. An unknown session or one that doesn't run is told with an error line and replied to
   // all the same; 0 with neither.

@@ -23,6 +23,12 @@ enum class TarnReportingOutcome : std::uint8_t {
   Refused,         // reporting is disabled, or memory was missing in the middle of it
 };
 
+// Of a session that took the message, which so many of its workers got.
+constexpr TarnReportingOutcome TarnReportingOutcomeOf(bool isRedundant, std::size_t workers) noexcept {
+  if (isRedundant) return TarnReportingOutcome::Redundant;
+  return workers != 0 ? TarnReportingOutcome::Delivered : TarnReportingOutcome::Unwanted;
+}
+
 // Counts since the process began; they never go down. Threads: the server queue.
 struct TarnReportingMessageCounts {
   // By the number of the outcome.

@@ -29,12 +29,6 @@ plist::ValueView textOf(const platform::ReporterIDs& reporterIDs, plist::Array& 
   return storage;
 }
 
-// What became of a record that so many workers got.
-TarnReportingOutcome outcomeOf(const TarnReportingSessionMessage& record, std::size_t workers) {
-  if (record.isRedundant()) return TarnReportingOutcome::Redundant;
-  return workers != 0 ? TarnReportingOutcome::Delivered : TarnReportingOutcome::Unwanted;
-}
-
 // The better of two sessions' outcomes of one message.
 void improve(TarnReportingOutcome& outcome, TarnReportingOutcome another) {
   outcome = std::min(outcome, another);
@@ -109,7 +103,8 @@ void TarnReportingMessageDelivery::handOver(const std::shared_ptr<TarnReportingS
   const auto record = std::make_shared<TarnReportingSessionMessage>(isLast ? std::move(message_) : message_,
                                                                     static_cast<AudioEventCategory>(category_),
                                                                     static_cast<AudioEventType>(type_));
-  improve(outcome_, outcomeOf(*record, session->sendMessage(record)));
+  const std::size_t workers = session->sendMessage(record);
+  improve(outcome_, TarnReportingOutcomeOf(record->isRedundant(), workers));
 }
 
 }  // namespace tarn

@@ -19,6 +19,7 @@ void TarnReportingSessionIndex::add(std::int64_t reporterID, std::uint64_t numbe
   }
   ++sessions;
   ++sessionCount_;
+  ++changes_;
 }
 
 bool TarnReportingSessionIndex::removeHolder(std::int64_t reporterID, std::uint64_t number) noexcept {
@@ -34,6 +35,7 @@ bool TarnReportingSessionIndex::removeHolder(std::int64_t reporterID, std::uint6
 void TarnReportingSessionIndex::remove(std::int64_t reporterID, std::uint64_t number) {
   if (!removeHolder(reporterID, number)) return;
   --sessionCount_;
+  ++changes_;
   if (const auto count = sessionsOf_.find(number); count != sessionsOf_.end() && --count->second == 0) {
     sessionsOf_.erase(count);
     clients_.erase(number);

@@ -38,6 +38,11 @@ class TarnReportingSessionIndex {
   // So many more sessions run; fewer, when it is negative. Which ones run is known to the clients' maps alone.
   void addRunning(std::ptrdiff_t count) noexcept { running_ += static_cast<std::size_t>(count); }
 
+  // A client has another session under an ID that it had one under.
+  void noteReplaced() noexcept { ++changes_; }
+  // How often it changed who has which session: what was found holds as long as this stays.
+  std::uint64_t changes() const noexcept { return changes_; }
+
   // The first client in the order of connection that has a session under this ID; null for none. Whether its session
   // runs doesn't matter.
   Client* firstHolder(std::int64_t reporterID) const;
@@ -64,6 +69,7 @@ class TarnReportingSessionIndex {
   Clients clients_;
   std::size_t sessionCount_ = 0;
   std::size_t running_ = 0;
+  std::uint64_t changes_ = 0;
 };
 
 }  // namespace tarn

@@ -32,6 +32,9 @@ void TarnReportingSessionMap::store(std::int64_t reporterID, Session session) {
   if (const auto place = places_.find(reporterID); place != places_.end()) {
     setRunning(reporterID, false);
     ordered_.at(place->second).session = std::move(session);
+    if (index_ != nullptr) {
+      index_->noteReplaced();
+    }
     return;
   }
   const auto entry = ordered_.emplace(nextPlace_, Entry{reporterID, std::move(session), {}}).first;

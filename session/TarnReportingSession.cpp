@@ -91,6 +91,7 @@ TarnReportingSession::TarnReportingSession(std::int64_t reporterID, std::vector<
       processIdentifiers_(std::move(processIdentifiers)),
       mode_(mode),
       serviceName_(TarnReportingUtilityGenerateServiceNameFromServiceType(serviceType_)),
+      application_(TarnReportingUtilityRetrieveAppName(configuration_)),
       chronicle_(recordsFor(mode), factsOf(reporterID, processIdentifiers_, opener, serviceName_)),
       log_(reporterID) {}
 
@@ -115,8 +116,11 @@ void TarnReportingSession::updateConfigurationWithContentsOfConfiguration(const 
   static const plist::Key kMirrored("KvHostApplicationDisplayID");
   if (configuration == nullptr) return;
   const platform::SessionScope scope = chronicle_.enter();
-  configuration_.set(keys::kHostApplicationDisplayID, configuration->get(kMirrored));
-  configuration_.merge(*configuration);
+  plist::Dictionary merged = configuration_;
+  merged.set(keys::kHostApplicationDisplayID, configuration->get(kMirrored));
+  merged.merge(*configuration);
+  application_ = plist::Key(TarnReportingUtilityRetrieveAppName(merged));
+  configuration_ = std::move(merged);
   describe();
 }
 

@@ -13,6 +13,7 @@
 #include <memory>
 #include <span>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "platform/TarnReportingServiceProtocol.h"
@@ -21,6 +22,7 @@
 #include "session/TarnReportingSessionChronicle.h"
 #include "session/TarnReportingSessionMessageLog.h"
 #include "session/TarnReportingSessionPreviousValues.h"
+#include "session/TarnReportingSessionTags.h"
 #include "session/TarnReportingSessionWorkerSet.h"
 
 namespace tarn {
@@ -83,6 +85,13 @@ class TarnReportingSession : public std::enable_shared_from_this<TarnReportingSe
   // the workers that ask for such. It doesn't matter whether the session is started; but before the first start only
   // the workers that start on creation are there to get it, and between a stop and the next start nobody is.
   std::size_t sendMessage(const MessagePointer& message, platform::Reply<> reply = nullptr);
+  // What became of a message.
+  struct Taken {
+    bool isRedundant = false;
+    std::size_t workers = 0;  // that got it
+  };
+  // The same of a message whose payload is a draft still: what the intake adds is in the one block that is made of it.
+  Taken sendMessage(const plist::PackedBuilder::Draft& draft, AudioEventCategory category, AudioEventType type);
 
   // The steps of the intake; each changes the record's payload in place. A payload without a time stamp gets the
   // present one, and "invalid_timestamp" "nil"; one whose stamp is older than 365 days gets it too, and the old stamp
@@ -155,7 +164,14 @@ class TarnReportingSession : public std::enable_shared_from_this<TarnReportingSe
   // The process's lists, derived from the table on first use.
   static const TarnReportingSessionWorkerClasses& workerClasses();
   // The two steps of the intake in one, as far as that goes.
-  void addTagAndAppName(TarnReportingSessionMessage& message) const;
+  void addTagAndAppName(TarnReportingSessionMessage& message);
+  // What a message with this draft for a payload becomes; whether its payload is complete.
+  std::pair<MessagePointer, bool> makeMessage(const plist::PackedBuilder::Draft& draft, AudioEventCategory category,
+                                              AudioEventType type);
+  // The first half of the intake: completes the payload. Then the second.
+  void complete(TarnReportingSessionMessage& message);
+  std::size_t takeIn(const MessagePointer& message);
+  TarnReportingSessionTags& tags();
   // Tells the chronicle what became known.
   void describe();
   // A stamped and tagged marker of this type; `method` is "start" or "stop" and the end of its keys.
@@ -168,12 +184,14 @@ class TarnReportingSession : public std::enable_shared_from_this<TarnReportingSe
   AudioServiceType serviceType_ = AudioServiceType::Unknown;
   std::string_view serviceName_;
   plist::Dictionary configuration_;
+  plist::Key application_;  // of the configuration, as messages get it
   std::string clientProcessName_;
   std::int64_t totalMessageCount_ = 0;
   TarnReportingSessionChronicle chronicle_;
   platform::Acknowledge transactionCompleteBlock_;
   TarnReportingSessionPreviousValues previousValues_;
   TarnReportingSessionMessageLog log_;
+  std::shared_ptr<TarnReportingSessionTags> tags_;  // from the first message on
   TarnReportingSessionWorkerSet workers_;
 };
 

@@ -7,8 +7,8 @@
 #include "platform/Clock.h"
 #include "platform/Facilities.h"
 #include "platform/TracePoints.h"
-#include "plist/PackedBuilder.h"
 #include "plist/Value.h"
+#include "service/vocabulary/ProcessState.h"
 #include "service/vocabulary/TarnReportingLog.h"
 #include "service/vocabulary/TarnReportingPlatform.h"
 #include "service/vocabulary/TarnReportingServerQueue.h"
@@ -36,6 +36,10 @@ std::string withoutBlanks(std::string_view key) {
   return replaced;
 }
 
+bool isStale(const plist::ValueView& stamp, double now) {
+  return stamp.asDouble() < now - kOldestStampSeconds;
+}
+
 std::string tagOf(const TarnReportingSessionMessage& message) {
   std::string tag = TarnReportingUtilityCategoryString(message.category());
   tag += TarnReportingUtilityTypeString(message.type());
@@ -49,9 +53,46 @@ std::size_t TarnReportingSession::sendMessage(const MessagePointer& message, pla
   const TarnReportingSignpost signpost(SignpostCategory::Message, kModule, "sendMessage", {"reporterID", reporterID_});
   const platform::SessionScope scope = chronicle_.enter();
   ++totalMessageCount_;
-  addMissingDates(*message);
-  removeWhiteSpaceFromKeys(*message);
-  addTagAndAppName(*message);
+  complete(*message);
+  const std::size_t workers = takeIn(message);
+  if (reply) {
+    reply(std::nullopt);
+  }
+  return workers;
+}
+
+TarnReportingSession::Taken TarnReportingSession::sendMessage(const plist::PackedBuilder::Draft& draft,
+                                                              AudioEventCategory category, AudioEventType type) {
+  assert(TarnReportingIsOnServerQueue());
+  const TarnReportingSignpost signpost(SignpostCategory::Message, kModule, "sendMessage", {"reporterID", reporterID_});
+  const platform::SessionScope scope = chronicle_.enter();
+  const auto [message, isComplete] = makeMessage(draft, category, type);
+  ++totalMessageCount_;
+  if (!isComplete) {
+    complete(*message);
+  }
+  const std::size_t workers = takeIn(message);
+  return {message->isRedundant(), workers};
+}
+
+// As complete() would leave it, where that would add tag and application and nothing else.
+std::pair<TarnReportingSession::MessagePointer, bool> TarnReportingSession::makeMessage(
+    const plist::PackedBuilder::Draft& draft, AudioEventCategory category, AudioEventType type) {
+  const TarnReportingSessionTags::Known* const known = tags().find(draft, category, type, application_);
+  const bool isPlain =
+      known != nullptr && !isStale(draft.at(known->stamp), TarnReportingFacilities().clock.epochSeconds());
+  return {std::make_shared<TarnReportingSessionMessage>(isPlain ? known->added.addedTo(draft) : draft.dictionary(),
+                                                        category, type),
+          isPlain};
+}
+
+void TarnReportingSession::complete(TarnReportingSessionMessage& message) {
+  addMissingDates(message);
+  removeWhiteSpaceFromKeys(message);
+  addTagAndAppName(message);
+}
+
+std::size_t TarnReportingSession::takeIn(const MessagePointer& message) {
   TarnReportingFacilities().tracePoints.emit(kTraceMessage, reporterID_);
   message->setIsSessionStarted(started_);
   message->setIsRedundant(messageIsRedundant(*message));
@@ -64,11 +105,14 @@ std::size_t TarnReportingSession::sendMessage(const MessagePointer& message, pla
   if (!message->isRedundant()) {
     log_.append(message);
   }
-  const std::size_t workers = workers_.deliver(message, reporterID_);
-  if (reply) {
-    reply(std::nullopt);
+  return workers_.deliver(message, reporterID_);
+}
+
+TarnReportingSessionTags& TarnReportingSession::tags() {
+  if (!tags_) [[unlikely]] {
+    tags_ = ProcessState::of<TarnReportingSessionTags>();
   }
-  return workers;
+  return *tags_;
 }
 
 void TarnReportingSession::addMissingDates(TarnReportingSessionMessage& message) {
@@ -78,7 +122,7 @@ void TarnReportingSession::addMissingDates(TarnReportingSessionMessage& message)
   if (!stamp) {
     payload.set(keys::kInvalidTimestamp, "nil");
     payload.set(keys::kTimestamp, now);
-  } else if (stamp.asDouble() < now - kOldestStampSeconds) {
+  } else if (isStale(stamp, now)) {
     payload.set(keys::kInvalidTimestamp, stamp);
     payload.set(keys::kTimestamp, now);
   }
@@ -111,19 +155,14 @@ void TarnReportingSession::removeWhiteSpaceFromKeys(TarnReportingSessionMessage&
   payload = plist::Dictionary::fromEntries(entries);
 }
 
-// Nearly every message comes without an application of its own: then its block grows once for both.
-void TarnReportingSession::addTagAndAppName(TarnReportingSessionMessage& message) const {
-  const plist::ValueView application = configuration_.get(keys::kHostApplicationDisplayID);
-  if (!application.isText() || message.message().contains(keys::kHostApplicationDisplayID)) {
-    addAudioMessageTag(message);
-    addAppName(message);
-    return;
+// Nearly every message comes without a tag and an application of its own: then its block grows once for both.
+void TarnReportingSession::addTagAndAppName(TarnReportingSessionMessage& message) {
+  {
+    const MutexLock guard(message);
+    if (tags().addTo(message.mutableMessage(), message.category(), message.type(), application_)) return;
   }
-  const std::string tag = tagOf(message);
-  const MutexLock guard(message);
-  const std::array<plist::Dictionary::Entry, 2> added{
-      {{keys::kAudioTag, tag}, {keys::kHostApplicationDisplayID, application}}};
-  plist::PackedBuilder::setEntries(message.mutableMessage(), added);
+  addAudioMessageTag(message);
+  addAppName(message);
 }
 
 void TarnReportingSession::addAudioMessageTag(TarnReportingSessionMessage& message) {
@@ -135,12 +174,7 @@ void TarnReportingSession::addAppName(TarnReportingSessionMessage& message) cons
   plist::Dictionary& payload = message.mutableMessage();
   const plist::ValueView present = payload.get(keys::kHostApplicationDisplayID);
   if (present && !(present == plist::ValueView("Unknown"))) return;
-  const plist::ValueView known = configuration_.get(keys::kHostApplicationDisplayID);
-  if (known.isText()) {  // as it lies there
-    payload.set(keys::kHostApplicationDisplayID, known);
-  } else {
-    payload.set(keys::kHostApplicationDisplayID, TarnReportingUtilityRetrieveAppName(configuration_));
-  }
+  payload.set(keys::kHostApplicationDisplayID, application_.text());
 }
 
 bool TarnReportingSession::messageIsRedundant(const TarnReportingSessionMessage& message) const {

@@ -62,11 +62,14 @@ bool TarnReportingSessionSummaryWorker::start() {
 
 void TarnReportingSessionSummaryWorker::handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) {
   const plist::Dictionary& payload = message->message();
+  if (payload.hasKeys(keysWithout_)) return;
   if (const plist::ValueView duration = payload.get(kSessionDuration)) {
     totalActiveTime_ += duration.asDouble();
     ++activeCount_;
-  } else if (payload.get(kIssueType) == plist::ValueView("overload")) {
-    ++overloadCount_;
+  } else if (const plist::ValueView issue = payload.get(kIssueType)) {
+    overloadCount_ += issue == plist::ValueView("overload") ? 1U : 0U;
+  } else {
+    keysWithout_ = payload.keys();
   }
 }
 

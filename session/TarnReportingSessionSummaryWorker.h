@@ -47,6 +47,8 @@ class TarnReportingSessionSummaryWorker : public TarnReportingSessionWorkerProto
   // The payload of the summary, before the intake adds to it.
   plist::Dictionary summary(const TarnReportingSession& session) const;
 
+  // Of the last message that had neither key of those that are counted: the next one's, mostly.
+  plist::KeyList keysWithout_;
   double totalActiveTime_ = 0;  // seconds, the sum of "session_duration"
   std::uint32_t activeCount_ = 0;
   std::uint32_t overloadCount_ = 0;

@@ -26,6 +26,65 @@ static_assert(static_cast<int>(wire::ErrorCode::UnknownOperation) == TARNRING_UN
 
 }  // namespace
 
+// The messages of one ring from one that was looked at and decoded already, to the first record that isn't a message
+// for one session or isn't to be handed on now.
+class ConnectionRings::Run final : public platform::MessageRun {
+ public:
+  Run(ConnectionRings& rings, RingReader& reader, RingOwner& owner, const ring::Record& record,
+      const ShapeTable::Message& message) noexcept
+      : rings_(rings), reader_(reader), owner_(owner), record_(record), decoded_(message) {}
+
+  const Message* next() override {
+    if (std::exchange(began_, true) && !lookForMore()) return nullptr;
+    // Before it is handed over: see serveRequest().
+    rings_.take(reader_, record_);
+    ++rings_.board_.counts.messages;
+    owner_.countRingMessage();
+    message_ = {decoded_.payload, decoded_.category, decoded_.type, decoded_.reporterIDs->value().front()};
+    return &message_;
+  }
+  bool began() const noexcept { return began_; }
+
+  static bool isFor(const ShapeTable::Message& message) noexcept {
+    return *message.reporterIDs && (*message.reporterIDs)->size() == 1;
+  }
+
+ private:
+  // Whether the next record is a message that belongs to the run. What is wrong with its values is refused and passed.
+  bool lookForMore() {
+    while (rings_.share_ != 0 && !reader_.isAtEnd() && owner_.takesMoreOfTheRun() && MemoryReserve::isWhole() &&
+           reader_.consumer().next(rings_.buffer_.data(), record_) == ring::Look::Record &&
+           record_.kind == TARNRING_MESSAGE) {
+      switch (decode()) {
+        case ShapeTable::Decoded::Ok:
+          return isFor(decoded_);
+        case ShapeTable::Decoded::UnknownShape:
+          return false;
+        case ShapeTable::Decoded::BadValues:
+          rings_.refuseRecord(reader_, record_, TARNRING_BAD_VALUES);
+          break;
+      }
+    }
+    return false;
+  }
+  // Without the memory for it, it is left to be looked at once more after the run.
+  ShapeTable::Decoded decode() {
+    try {
+      return rings_.decodeMessage(record_, decoded_);
+    } catch (const std::bad_alloc&) {
+      return ShapeTable::Decoded::UnknownShape;
+    }
+  }
+
+  ConnectionRings& rings_;
+  RingReader& reader_;
+  RingOwner& owner_;
+  ring::Record record_;
+  ShapeTable::Message decoded_;
+  Message message_;
+  bool began_ = false;
+};
+
 ConnectionRings::ConnectionRings(RingBoard& board, std::weak_ptr<RingOwner> owner)
     : board_(board), owner_(std::move(owner)) {}
 
@@ -115,13 +174,13 @@ bool ConnectionRings::has(const RingIdentity& identity) const noexcept {
 }
 
 bool ConnectionRings::serveTurn(std::chrono::nanoseconds now) {
-  std::size_t share = board_.limits.turnBytes;
+  share_ = board_.limits.turnBytes;
   served_.clear();
   for (std::size_t i = 0; i < rings_.size(); ++i) {
     const auto reader = rings_[(first_ + i) % rings_.size()];
     if (reader->asleep) continue;
     const std::uint64_t before = reader->consumer().taken();
-    const bool held = serveRing(*reader, share);
+    const bool held = serveRing(*reader);
     const std::uint64_t dropped = reader->newlyDropped();
     dropped_ += dropped;
     board_.counts.droppedByClients += dropped;
@@ -138,7 +197,7 @@ bool ConnectionRings::serveTurn(std::chrono::nanoseconds now) {
   noteDoneAfterTheWork();
   follow();
   closeFinished();
-  return share == 0;
+  return share_ == 0;
 }
 
 // Tells what the recorder has of it, where somebody waits for that.
@@ -154,10 +213,10 @@ void ConnectionRings::follow() {
 }
 
 // Serves records until there are none, the share is used up or one is held. Whether one is.
-bool ConnectionRings::serveRing(RingReader& reader, std::size_t& share) {
+bool ConnectionRings::serveRing(RingReader& reader) {
   const auto owner = owner_.lock();
-  while (owner != nullptr && share != 0 && !reader.finished && !reader.isAtEnd()) {
-    const Step step = serveRecord(reader, *owner, share);
+  while (owner != nullptr && share_ != 0 && !reader.finished && !reader.isAtEnd()) {
+    const Step step = serveRecord(reader, *owner);
     if (step == Step::Held) return true;
     if (step == Step::Nothing) {
       reader.finished = reader.finished || reader.ending() || reader.consumer().ended();
@@ -169,7 +228,7 @@ bool ConnectionRings::serveRing(RingReader& reader, std::size_t& share) {
   return false;
 }
 
-ConnectionRings::Step ConnectionRings::serveRecord(RingReader& reader, RingOwner& owner, std::size_t& share) {
+ConnectionRings::Step ConnectionRings::serveRecord(RingReader& reader, RingOwner& owner) {
   ring::Record record;
   const ring::Look look = reader.consumer().next(buffer_.data(), record);
   if (look == ring::Look::Broken) {
@@ -178,18 +237,18 @@ ConnectionRings::Step ConnectionRings::serveRecord(RingReader& reader, RingOwner
     logPrefixed(board_.log, kConnectionCategory, platform::LogLevel::Error, kModule,
                 "closed a ring of " + owner.description() + ": " + textOf(RingFault::Broken));
   }
-  if (look != ring::Look::Record) return Step::Nothing;
-  const Step step = serveContent(reader, owner, record);
-  if (step == Step::Served) {
-    share -= std::min<std::size_t>(share, TARNRING_RECORD_HEAD_BYTES + tarnring_padded(record.length));
-  }
-  return step;
+  return look == ring::Look::Record ? serveContent(reader, owner, record) : Step::Nothing;
+}
+
+void ConnectionRings::take(RingReader& reader, const ring::Record& record) {
+  reader.consumer().take(record);
+  share_ -= std::min<std::size_t>(share_, TARNRING_RECORD_HEAD_BYTES + tarnring_padded(record.length));
 }
 
 ConnectionRings::Step ConnectionRings::serveContent(RingReader& reader, RingOwner& owner, const ring::Record& record) {
   if (record.kind == TARNRING_GAP) {
     ++board_.counts.gaps;
-    reader.consumer().take(record);
+    take(reader, record);
     return Step::Served;
   }
   if (!owner.takesRingRequests()) return Step::Held;
@@ -201,7 +260,8 @@ ConnectionRings::Step ConnectionRings::serveContent(RingReader& reader, RingOwne
 }
 
 ConnectionRings::Step ConnectionRings::serveMessage(RingReader& reader, RingOwner& owner, const ring::Record& record) {
-  switch (decodeMessage(record)) {
+  ShapeTable::Message message;
+  switch (decodeMessage(record, message)) {
     case ShapeTable::Decoded::UnknownShape:
       // It may be on its way on the socket still.
       return reader.ending() ? refuseRecord(reader, record, TARNRING_UNKNOWN_SHAPE) : Step::Held;
@@ -210,12 +270,25 @@ ConnectionRings::Step ConnectionRings::serveMessage(RingReader& reader, RingOwne
     case ShapeTable::Decoded::Ok:
       break;
   }
+  if (serveRun(reader, owner, record, message)) return Step::Served;
+  {
+    const MemoryReserve::Refusable refusable;
+    board_.request = message.request();
+  }
   return serveRequest(reader, owner, record);
 }
 
-ShapeTable::Decoded ConnectionRings::decodeMessage(const ring::Record& record) {
+ShapeTable::Decoded ConnectionRings::decodeMessage(const ring::Record& record, ShapeTable::Message& message) {
   const MemoryReserve::Refusable refusable;
-  return shapes_.decode(contentOf(record), board_.request);
+  return shapes_.decode(contentOf(record), message);
+}
+
+// While the reserve isn't whole a message isn't taken before there is memory for all of it.
+bool ConnectionRings::serveRun(RingReader& reader, RingOwner& owner, const ring::Record& record,
+                               const ShapeTable::Message& message) {
+  if (!Run::isFor(message) || !MemoryReserve::isWhole()) return false;
+  Run run(*this, reader, owner, record, message);
+  return owner.serveRingMessages(run) && run.began();
 }
 
 // The record is taken before it is handed over: the recorder may commit what comes of it while this turn goes on, and a
@@ -223,7 +296,7 @@ ShapeTable::Decoded ConnectionRings::decodeMessage(const ring::Record& record) {
 // back to be tried again.
 ConnectionRings::Step ConnectionRings::serveRequest(RingReader& reader, RingOwner& owner, const ring::Record& record) {
   board_.counts.messages += board_.request.operation == wire::Operation::SendMessage ? 1 : 0;
-  reader.consumer().take(record);
+  take(reader, record);
   const bool served =
       MemoryReserve::orGiveUp(MemoryReserve::Loss::Request, [&] { owner.serveRingRequest(board_.request); });
   if (!served) {
@@ -246,7 +319,7 @@ ConnectionRings::Step ConnectionRings::serveFrame(RingReader& reader, RingOwner&
     if (shapes_.declare(board_.request.dictionary).failed()) {
       return refuseRecord(reader, record, TARNRING_BAD_ARGUMENTS);
     }
-    reader.consumer().take(record);
+    take(reader, record);
     return Step::Served;
   }
   if (wire::rowOf(board_.request.operation).servedBy == wire::ServedBy::Host) {
@@ -259,7 +332,7 @@ ConnectionRings::Step ConnectionRings::serveFrame(RingReader& reader, RingOwner&
 ConnectionRings::Step ConnectionRings::refuseRecord(RingReader& reader, const ring::Record& record,
                                                     tarnring_refusal reason) {
   countRefusal(reader, reason);
-  reader.consumer().take(record);
+  take(reader, record);
   return Step::Served;
 }
 

@@ -23,6 +23,7 @@
 
 #include "host/ring/RingReader.h"
 #include "host/ring/ShapeTable.h"
+#include "platform/TarnReportingServiceProtocol.h"
 #include "platform/UniqueFunction.h"
 #include "plist/Result.h"
 #include "wire/RequestDecoder.h"
@@ -42,6 +43,13 @@ class RingOwner {
   virtual void afterRingRequests(platform::Work work) = 0;
   // A checked request of the service, to which there is no reply. It may be moved from.
   virtual void serveRingRequest(wire::DecodedRequest& request) = 0;
+  // Hands messages on as one piece of work, ahead of the connection's turn, until the run gives no more. False, and
+  // nothing was taken of the run: its messages are to be handed on one by one.
+  virtual bool serveRingMessages(platform::MessageRun& run) = 0;
+  // Asked before each further message of the run: whether there is one still in the turn. Must be cheap.
+  virtual bool takesMoreOfTheRun() = 0;
+  // A message of the run is taken, and comes next.
+  virtual void countRingMessage() = 0;
   // The record of the last request is done with: what it asked for may be done before the next one is read. Work that
   // memory is missing for is given up in there, so the ring is read on.
   virtual void workOffRingRequest() = 0;
@@ -89,15 +97,21 @@ class ConnectionRings : public std::enable_shared_from_this<ConnectionRings> {
   // Whether it went on (Served), there is no more to read (Nothing), or the next record can't be handed on now (Held).
   enum class Step : std::uint8_t { Served, Nothing, Held };
 
+  class Run;
+
   // What speaks against opening; the cheap questions first. `memory` is mapped when nothing does.
   std::optional<RingFault> check(const std::vector<UniqueDescriptor>& descriptors, RingMemory& memory) const;
   Error refuse(RingFault fault);
-  // Takes what it read off `share`, in bytes with the records' heads. True: a record is held.
-  bool serveRing(RingReader& reader, std::size_t& share);
-  Step serveRecord(RingReader& reader, RingOwner& owner, std::size_t& share);
+  // True: a record is held.
+  bool serveRing(RingReader& reader);
+  Step serveRecord(RingReader& reader, RingOwner& owner);
   Step serveContent(RingReader& reader, RingOwner& owner, const ring::Record& record);
   Step serveMessage(RingReader& reader, RingOwner& owner, const ring::Record& record);
-  ShapeTable::Decoded decodeMessage(const ring::Record& record);
+  ShapeTable::Decoded decodeMessage(const ring::Record& record, ShapeTable::Message& message);
+  // The message and those after it; nothing is taken where that is not possible now.
+  bool serveRun(RingReader& reader, RingOwner& owner, const ring::Record& record, const ShapeTable::Message& message);
+  // Goes on after the record, and takes it off the share of the turn.
+  void take(RingReader& reader, const ring::Record& record);
   Step serveRequest(RingReader& reader, RingOwner& owner, const ring::Record& record);
   Step serveFrame(RingReader& reader, RingOwner& owner, const ring::Record& record);
   Step refuseRecord(RingReader& reader, const ring::Record& record, tarnring_refusal reason);
@@ -119,6 +133,7 @@ class ConnectionRings : public std::enable_shared_from_this<ConnectionRings> {
   std::vector<std::shared_ptr<RingReader>> rings_;
   std::vector<std::shared_ptr<RingReader>> served_;  // in this turn
   std::vector<std::byte> buffer_;                    // a record's content
+  std::size_t share_ = 0;                            // left of the turn, in bytes of records with their heads
   std::size_t first_ = 0;                            // whose turn it is to be served first
   std::uint64_t nextNumber_ = 1;
   // Messages that found no room in rings of the connection, as their clients tell it; logged at the end.

@@ -46,36 +46,47 @@ class ValueWords {
   std::span<const std::byte> left_;
 };
 
-bool takeString(ValueWords& words, ShapeKind kind, plist::ValueView& value) {
+bool addString(ValueWords& words, ShapeKind kind, plist::PackedBuilder::Draft& payload) {
   std::string_view bytes;
-  if (!words.takeBytes(bytes) || (kind == ShapeKind::Text && !wire::isUtf8(bytes))) return false;
-  value = kind == ShapeKind::Text ? plist::ValueView(bytes) : plist::ValueView(plist::DataView{bytes});
-  return true;
+  if (!words.takeBytes(bytes)) return false;
+  if (kind == ShapeKind::Data) {
+    payload.add(plist::DataView{bytes});
+    return true;
+  }
+  payload.add(bytes);
+  return wire::isUtf8(bytes);
 }
 
-bool takeValue(ValueWords& words, ShapeKind kind, plist::ValueView& value) {
-  if (kind == ShapeKind::Text || kind == ShapeKind::Data) return takeString(words, kind, value);
+bool addValue(ValueWords& words, ShapeKind kind, plist::PackedBuilder::Draft& payload) {
+  if (kind == ShapeKind::Text || kind == ShapeKind::Data) return addString(words, kind, payload);
   std::uint64_t word = 0;
   if (!words.take(word)) return false;
   switch (kind) {
     case ShapeKind::Unsigned:
       // One integer has one kind: unsigned only where signed can't hold it.
-      value = std::in_range<std::int64_t>(word) ? plist::ValueView(static_cast<std::int64_t>(word))
-                                                : plist::ValueView(word);
+      payload.add(std::in_range<std::int64_t>(word) ? plist::ValueView(static_cast<std::int64_t>(word))
+                                                    : plist::ValueView(word));
       return true;
     case ShapeKind::Double:
-      value = std::bit_cast<double>(word);
+      payload.add(std::bit_cast<double>(word));
       return true;
     case ShapeKind::Date:
-      value = plist::Date{std::bit_cast<double>(word)};
+      payload.add(plist::Date{std::bit_cast<double>(word)});
       return true;
     case ShapeKind::Boolean:
-      value = word == 1;
+      payload.add(word == 1);
       return word <= 1;
     default:
-      value = static_cast<std::int64_t>(word);
+      payload.add(static_cast<std::int64_t>(word));
       return true;
   }
+}
+
+// Bytes that the values of such a content take at most once they are packed, and a time stamp. A text or data takes no
+// more than here; all else 8 bytes here.
+std::size_t mostPacked(std::size_t contentBytes) {
+  constexpr std::size_t kMost = plist::PackedBuilder::Draft::kMostValueBytes;
+  return contentBytes / sizeof(std::uint64_t) * kMost + kMost;
 }
 
 bool readNumber(const plist::ValueView& value, std::uint64_t most, std::uint64_t& number) {
@@ -173,7 +184,26 @@ Status ShapeTable::readKeys(const plist::Dictionary& description, Shape& shape) 
   return {};
 }
 
+wire::DecodedRequest ShapeTable::Message::request() const {
+  wire::DecodedRequest request;
+  request.operation = wire::Operation::SendMessage;
+  request.dictionary = payload->dictionary();
+  request.category = category;
+  request.type = type;
+  request.reporterIDs = *reporterIDs;
+  return request;
+}
+
 ShapeTable::Decoded ShapeTable::decode(std::span<const std::byte> content, wire::DecodedRequest& request) {
+  Message message;
+  const Decoded decoded = decode(content, message);
+  if (decoded == Decoded::Ok) {
+    request = message.request();
+  }
+  return decoded;
+}
+
+ShapeTable::Decoded ShapeTable::decode(std::span<const std::byte> content, Message& message) {
   tarnring_message head{};
   if (content.size() < sizeof head) return Decoded::BadValues;
   std::memcpy(&head, content.data(), sizeof head);
@@ -181,30 +211,18 @@ ShapeTable::Decoded ShapeTable::decode(std::span<const std::byte> content, wire:
     return head.shape < TARNRING_MOST_SHAPES ? Decoded::UnknownShape : Decoded::BadValues;
   }
   const Shape& shape = *shapes_[head.shape];
+  if (head.count != shape.kinds.size()) return Decoded::BadValues;
   ValueWords words(content.subspan(sizeof head));
-  bool fits = head.count == shape.kinds.size();
-  builder_.reset();  // of one that memory was missing for
-  builder_.begin();
-  for (auto kind = shape.kinds.begin(); fits && kind != shape.kinds.end(); ++kind) {
-    plist::ValueView value;
-    fits = takeValue(words, *kind, value);
-    if (fits) {
-      builder_.add(value);
-    }
+  draft_.begin(mostPacked(content.size()));
+  for (const ShapeKind kind : shape.kinds) {
+    if (!addValue(words, kind, draft_)) return Decoded::BadValues;
   }
-  if (!fits || !words.atEnd()) {
-    builder_.reset();
-    return Decoded::BadValues;
-  }
+  if (!words.atEnd()) return Decoded::BadValues;
   if (shape.addsStamp) {
-    builder_.add(static_cast<double>(head.stamp) / 1e9);
+    draft_.add(static_cast<double>(head.stamp) / 1e9);
   }
-  request = {};
-  request.operation = wire::Operation::SendMessage;
-  request.dictionary = builder_.finishDictionary(shape.keys);
-  request.category = shape.category;
-  request.type = shape.type;
-  request.reporterIDs = shape.reporterIDs;
+  draft_.finish(shape.keys);
+  message = {&draft_, shape.category, shape.type, &shape.reporterIDs};
   return Decoded::Ok;
 }
 

@@ -6,8 +6,7 @@
 //
 // Owned by a connection's rings. Threads: the main loop's.
 //
-// Bounds: 1024 shapes, each of 64 keys of 255 bytes and 64 reporter IDs. A message costs one pass over its values and
-// one block for its dictionary.
+// Bounds: 1024 shapes, each of 64 keys of 255 bytes and 64 reporter IDs. A message costs one pass over its values.
 #pragma once
 
 #include <cstddef>
@@ -41,6 +40,16 @@ class ShapeTable {
   // outside its range, a key given twice; then the shape that was there stays.
   Status declare(const plist::Dictionary& description);
 
+  // A message as its record tells it; the payload has the time stamp.
+  struct Message {
+    const plist::PackedBuilder::Draft* payload = nullptr;
+    std::uint32_t category = 0;
+    std::uint16_t type = 0;
+    const wire::ReporterIDs* reporterIDs = nullptr;
+
+    wire::DecodedRequest request() const;
+  };
+
   // UnknownShape: it isn't declared, and may be yet. BadValues: the content isn't what its shape says, or its number is
   // beyond what there can be.
   enum class Decoded { Ok, UnknownShape, BadValues };
@@ -48,6 +57,9 @@ class ShapeTable {
   // the client can't change. Values must be as many as the shape's and fill the content to its end; text must be UTF-8,
   // a boolean 0 or 1. The record's stamp becomes the time stamp in seconds unless the shape has that key.
   Decoded decode(std::span<const std::byte> content, wire::DecodedRequest& request);
+  // The same without a block for the payload. `message` holds until the next call of either and until a shape is
+  // declared.
+  Decoded decode(std::span<const std::byte> content, Message& message);
 
  private:
   // One that was checked whole, as decoding needs it.
@@ -65,8 +77,7 @@ class ShapeTable {
   static Status readKeys(const plist::Dictionary& description, Shape& shape);
 
   std::vector<std::unique_ptr<Shape>> shapes_;  // by number
-  // Kept for its room; empty between messages.
-  plist::PackedBuilder builder_;
+  plist::PackedBuilder::Draft draft_;           // of the last message
 };
 
 }  // namespace tarn::linux_host

@@ -95,6 +95,9 @@ class SocketConnection final : public platform::Connection,
 
   bool takesRingRequests() override { return object_ != nullptr && host_.takesFrom(&party()); }
   void serveRingRequest(wire::DecodedRequest& request) override;
+  bool serveRingMessages(platform::MessageRun& run) override;
+  bool takesMoreOfTheRun() override { return lane_.hasTurn() && takesRingRequests(); }
+  void countRingMessage() override { ++host_.ledger.messagesReceived; }
   void workOffRingRequest() override;
   void afterRingRequests(platform::Work work) override;
 
@@ -125,6 +128,8 @@ class SocketConnection final : public platform::Connection,
   void serveRequest(wire::DecodedRequest& request, std::size_t frameBytes) noexcept;
   void takeRequest(wire::DecodedRequest& request, std::size_t frameBytes);
   void handOver(wire::DecodedRequest& request);
+  // Work in the lane ahead of the turn, which is charged for it.
+  void runLaneAhead();
   // The work in the lane. A piece that memory is missing for is given up.
   void runLane();
   void hold(wire::DecodedRequest& request, std::size_t frameBytes);

@@ -151,18 +151,29 @@ void SocketConnection::serveRingRequest(wire::DecodedRequest& request) {
   dispatchRequest(request, *object_, {});
 }
 
+bool SocketConnection::serveRingMessages(platform::MessageRun& run) {
+  if (!lane_.empty() || ringCost_ >= FairShares::kQuantum) return false;
+  host_.loop.queue()->asyncIn(lane_, [this, &run] { object_->sendMessages(run); });
+  runLaneAhead();
+  return true;
+}
+
 // Ahead of the connection's turn while that is cheap, and charged to it: what one message needs for a moment is then
 // in the cache still when the next one needs it. Work that waits for its turn is not overtaken.
 void SocketConnection::workOffRingRequest() {
   if (lane_.pieces() == 1 && ringCost_ < FairShares::kQuantum) {
-    const LogClientScope scope(client_);
-    lane_.beginTurn(FairShares::kQuantum - ringCost_);
-    runLane();
-    ringCost_ += lane_.spent();
+    runLaneAhead();
   }
   if (!lane_.empty()) {
     host_.shares.ready(self());
   }
+}
+
+void SocketConnection::runLaneAhead() {
+  const LogClientScope scope(client_);
+  lane_.beginTurn(FairShares::kQuantum - ringCost_);
+  runLane();
+  ringCost_ += lane_.spent();
 }
 
 void SocketConnection::afterRingRequests(platform::Work work) {

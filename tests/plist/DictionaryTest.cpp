@@ -6,6 +6,7 @@
 #include <array>
 #include <cmath>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "plist/Value.h"
@@ -243,6 +244,35 @@ TEST(Dictionary, EqualityLooksIntoContainers) {
   EXPECT_EQ(one, (Dictionary{{"list", Array{1.0, "x", Dictionary{{"k", 2}}}}}));
   EXPECT_FALSE(one == (Dictionary{{"list", Array{1, "x", Dictionary{{"k", 3}}}}}));
   EXPECT_FALSE(one == (Dictionary{{"list", Array{1, "x"}}}));
+}
+
+TEST(Dictionary, EqualsIgnoringTellsBytesFromValues) {
+  const Dictionary inner{{"x", 1}};
+  const Dictionary likewise{{"x", 1.0}};
+  const Array list{1};
+  const Array truths{true};
+  const std::vector<std::pair<ValueView, ValueView>> equal{
+      {0.0, -0.0},   {std::nan("1"), std::nan("2")}, {0.0F, -0.0F},
+      {1, 1.0},      {Date{0.0}, Date{-0.0}},        {inner, likewise},
+      {list, truths}};
+  for (const auto& [left, right] : equal) {
+    const Dictionary one{{"time", 1}, {"a", left}, {"b", "text"}};
+    EXPECT_TRUE(one.equalsIgnoring({{"time", "later"}, {"a", right}, {"b", "text"}}, std::array{Key("time")}));
+    EXPECT_FALSE(one.equalsIgnoring({{"time", "later"}, {"a", right}, {"b", "next"}}, std::array{Key("time")}));
+  }
+  const std::vector<std::pair<ValueView, ValueView>> unequal{
+      {1, 2}, {true, false}, {"ab", "ac"}, {"ab", "abc"}, {DataView{"a"}, DataView{"b"}}, {1.5, 2.5}, {"1", 1}};
+  for (const auto& [left, right] : unequal) {
+    const Dictionary one{{"time", 1}, {"a", left}, {"b", "text"}};
+    EXPECT_FALSE(one.equalsIgnoring({{"time", 2}, {"a", right}, {"b", "text"}}, std::array{Key("time")}));
+  }
+}
+
+TEST(Dictionary, EqualsIgnoringGoesOnAfterAnIgnoredValueOfAnotherLength) {
+  const std::array ignored{Key("time"), Key("last")};
+  const Dictionary one{{"a", 1}, {"time", "12"}, {"b", 2}, {"last", 1}};
+  EXPECT_TRUE(one.equalsIgnoring({{"a", 1}, {"time", std::string(300, 'x')}, {"b", 2}, {"last", 70000}}, ignored));
+  EXPECT_FALSE(one.equalsIgnoring({{"a", 1}, {"time", std::string(300, 'x')}, {"b", 3}, {"last", 70000}}, ignored));
 }
 
 TEST(Dictionary, EqualsIgnoringLeavesTheNamedKeysOut) {

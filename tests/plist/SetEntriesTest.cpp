@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <array>
+#include <span>
 #include <string>
 #include <vector>
 
@@ -24,10 +25,22 @@ std::vector<std::string> keysOf(const Dictionary& dictionary) {
   return keys;
 }
 
+// In one step where that is possible.
+void setEntries(Dictionary& dictionary, std::span<const Entry> entries) {
+  const PackedBuilder::Addition addition(dictionary.keys(), entries);
+  if (addition.isFor(dictionary)) {
+    addition.addTo(dictionary);
+    return;
+  }
+  for (const Entry& entry : entries) {
+    dictionary.set(entry.key, entry.value);
+  }
+}
+
 // Sets both ways and compares keys, values and key lists.
 void expectTheSame(const Dictionary& before, std::span<const Entry> entries) {
   Dictionary one = before;
-  PackedBuilder::setEntries(one, entries);
+  setEntries(one, entries);
   Dictionary other = before;
   for (const Entry& entry : entries) {
     other.set(entry.key, entry.value);
@@ -40,7 +53,7 @@ void expectTheSame(const Dictionary& before, std::span<const Entry> entries) {
 
 TEST(SetEntries, BothAreAddedInTheirOrder) {
   Dictionary dictionary{{"volume", 0.5}};
-  PackedBuilder::setEntries(dictionary, std::array<Entry, 2>{{{kTag, "PlaybackStart"}, {kName, "player"}}});
+  setEntries(dictionary, std::array<Entry, 2>{{{kTag, "PlaybackStart"}, {kName, "player"}}});
   EXPECT_EQ(keysOf(dictionary), (std::vector<std::string>{"volume", "audiotag", "HostApplicationDisplayID"}));
   EXPECT_EQ(dictionary.get(kTag), ValueView("PlaybackStart"));
   EXPECT_EQ(dictionary.get(kName), ValueView("player"));
@@ -69,7 +82,7 @@ TEST(SetEntries, AreThereAsIfSetOneAfterTheOther) {
 TEST(SetEntries, CopyDoesNotSeeThem) {
   Dictionary dictionary{{"volume", 0.5}, {"inner", Dictionary{{"a", 1}}}};
   const Dictionary copy = dictionary;
-  PackedBuilder::setEntries(dictionary, std::array<Entry, 2>{{{kTag, "PlaybackStart"}, {kName, "player"}}});
+  setEntries(dictionary, std::array<Entry, 2>{{{kTag, "PlaybackStart"}, {kName, "player"}}});
   EXPECT_EQ(keysOf(copy), (std::vector<std::string>{"volume", "inner"}));
   EXPECT_EQ(copy["inner"], dictionary["inner"]);
   EXPECT_EQ(dictionary.size(), 4U);
@@ -79,9 +92,35 @@ TEST(SetEntries, ContainerOutlivesWhatItCameFrom) {
   Dictionary dictionary{{"volume", 0.5}};
   {
     const Dictionary inner{{"a", "a text that is long enough for a block"}};
-    PackedBuilder::setEntries(dictionary, std::array<Entry, 2>{{{kTag, inner}, {kName, "player"}}});
+    setEntries(dictionary, std::array<Entry, 2>{{{kTag, inner}, {kName, "player"}}});
   }
   EXPECT_EQ(dictionary.get(kTag).dictionary()["a"], ValueView("a text that is long enough for a block"));
+}
+
+TEST(SetEntries, AreForDictionariesOfTheirKeysAlone) {
+  const std::array<Entry, 2> entries{{{kTag, "PlaybackStart"}, {kName, "player"}}};
+  const Dictionary volume{{"volume", 0.5}};
+  const PackedBuilder::Addition addition(volume.keys(), entries);
+  EXPECT_TRUE(addition.isFor(Dictionary{{"volume", "loud"}}));
+  EXPECT_FALSE(addition.isFor(Dictionary{{"gain", 0.5}}));
+  EXPECT_FALSE(addition.isFor(Dictionary{{"volume", 0.5}, {"gain", 1}}));
+  EXPECT_FALSE(addition.isFor(Dictionary()));
+}
+
+TEST(SetEntries, AreForNobodyWhereTheyNeedMoreThanOneStep) {
+  const std::string large(200, 'x');
+  const Dictionary volume{{"volume", 0.5}};
+  const Dictionary tagged{{"volume", 0.5}, {"audiotag", "own"}};
+  const auto isFor = [](const Dictionary& dictionary, const Entry& entry) {
+    return PackedBuilder::Addition(dictionary.keys(), std::array<Entry, 1>{entry}).isFor(dictionary);
+  };
+  EXPECT_TRUE(isFor(volume, {kTag, "own"}));
+  EXPECT_FALSE(isFor(tagged, {kTag, "own"}));
+  EXPECT_FALSE(isFor(volume, {kTag, large}));
+  EXPECT_FALSE(isFor(volume, {kTag, volume}));
+  EXPECT_FALSE(isFor(volume, {kTag, ValueView()}));
+  EXPECT_FALSE(isFor(Dictionary(), {kTag, "own"}));
+  EXPECT_FALSE(PackedBuilder::Addition().isFor(Dictionary()));
 }
 
 }  // namespace

@@ -3,6 +3,8 @@
 // runs, stops and goes.
 #include "service/TarnReportingSessionIndex.h"
 
+#include <utility>
+
 #include "service/TarnReportingSessionMap.h"
 #include "tests/service/ServiceFixture.h"
 
@@ -63,6 +65,23 @@ TEST_F(SessionIndex, ListsAClientWhileItHasASession) {
   EXPECT_EQ(index_->clients(), (TarnReportingSessionIndex::Clients{{4, first_.get()}}));
   index_->add(12, 5, *second_);
   EXPECT_EQ(index_->clients().size(), 2U);
+}
+
+TEST_F(SessionIndex, CountsHowOftenItChangedWhoHasWhichSession) {
+  TarnReportingSessionMap map;
+  map.list(index_, 5, *second_);
+  std::uint64_t before = index_->changes();
+  const auto changed = [&] { return std::exchange(before, index_->changes()) != index_->changes(); };
+  map.store(10, session(10));
+  EXPECT_TRUE(changed());
+  map.store(10, session(10));
+  EXPECT_TRUE(changed());
+  map.setRunning(10, true);
+  EXPECT_FALSE(changed());
+  map.remove(11);
+  EXPECT_FALSE(changed());
+  map.remove(10);
+  EXPECT_TRUE(changed());
 }
 
 TEST_F(SessionIndex, RemovingWhatIsNotThereChangesNothing) {

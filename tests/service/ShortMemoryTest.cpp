@@ -3,7 +3,9 @@
 #include <algorithm>
 #include <cstddef>
 #include <new>
+#include <utility>
 
+#include "plist/PackedBuilder.h"
 #include "service/TarnReportingSessionIndex.h"
 #include "tests/service/ServiceFixture.h"
 #include "tests/support/FailingAllocations.h"
@@ -73,6 +75,42 @@ TEST_F(ServiceShortMemory, EachMessageIsCountedOnce) {
     ASSERT_EQ(counted(), sent) << ordinal;
   }
   EXPECT_GT(sent, 5U);
+  EXPECT_GT(service_->messageCounts().of(TarnReportingOutcome::Refused), 0U);
+  EXPECT_EQ(send(client_, {{"last", 1}}, std::vector<std::int64_t>{7}), std::nullopt);
+}
+
+// Gives one message, as often as it is made.
+class OneMessage final : public platform::MessageRun {
+ public:
+  explicit OneMessage(std::uint64_t number) : keys_(plist::Dictionary{{"some text", 1}, {"number", 1}}.keys()) {
+    draft_.begin(64);
+    draft_.add("value");
+    draft_.add(number);
+    draft_.finish(keys_);
+    message_ = {&draft_, 4, 1, 7};
+  }
+  const Message* next() override { return std::exchange(given_, true) ? nullptr : &message_; }
+
+ private:
+  const plist::KeyList keys_;
+  plist::PackedBuilder::Draft draft_;
+  Message message_;
+  bool given_ = false;
+};
+
+TEST_F(ServiceShortMemory, EachMessageOfARunIsCountedOnce) {
+  create(client_, 7);
+  start(client_, 7, held_);
+  std::uint64_t sent = 0;
+  bool happened = true;
+  for (std::uint64_t ordinal = 1; happened; ++ordinal) {
+    ++sent;
+    OneMessage run(ordinal);
+    const auto sendRun = [this, &run] { client_.remote().sendMessages(run); };
+    happened = runWithout(ordinal, sendRun);
+    ASSERT_EQ(counted(), sent) << ordinal;
+  }
+  EXPECT_GT(sent, 3U);
   EXPECT_GT(service_->messageCounts().of(TarnReportingOutcome::Refused), 0U);
   EXPECT_EQ(send(client_, {{"last", 1}}, std::vector<std::int64_t>{7}), std::nullopt);
 }

@@ -31,6 +31,28 @@ class NotingOwner : public linux_host::RingOwner {
     requests.push_back(request);
     ++count;
   }
+  bool serveRingMessages(platform::MessageRun& run) override {
+    if (!takesRuns) return false;
+    leftOfRun = mostOfRun;
+    runs.push_back(0);
+    while (const platform::MessageRun::Message* const message = run.next()) {
+      ++runs.back();
+      wire::DecodedRequest request;
+      request.operation = wire::Operation::SendMessage;
+      request.dictionary = message->payload->dictionary();
+      request.category = message->category;
+      request.type = message->type;
+      request.reporterIDs = std::vector<std::int64_t>{message->reporterID};
+      try {
+        serveRingRequest(request);
+      } catch (const std::bad_alloc&) {
+        return true;  // as the queue gives up the piece of work
+      }
+    }
+    return true;
+  }
+  bool takesMoreOfTheRun() override { return takes && --leftOfRun > 0; }
+  void countRingMessage() override { ++announced; }
   void workOffRingRequest() override { workedOff.push_back(requests.size()); }
   void afterRingRequests(platform::Work work) override { loop_.queue()->async(std::move(work)); }
   std::string description() const override { return "connection 1 of process 2"; }
@@ -38,6 +60,10 @@ class NotingOwner : public linux_host::RingOwner {
   std::atomic<bool> takes{true};
   std::atomic<bool> hasNoMemory{false};
   std::atomic<std::size_t> count{0};
+  bool takesRuns = true;
+  std::int64_t mostOfRun = 1'000'000;  // messages of one run
+  std::vector<std::size_t> runs;       // messages of each
+  std::size_t announced = 0;           // messages of runs
   std::vector<wire::DecodedRequest> requests;
   std::vector<std::size_t> workedOff;  // so many requests had come each time
   // A ring, and how many of its messages were taken by its header when each request came.
@@ -46,6 +72,7 @@ class NotingOwner : public linux_host::RingOwner {
 
  private:
   linux_host::MainLoop& loop_;
+  std::int64_t leftOfRun = 0;
 };
 
 class RingFixture : public ::testing::Test {
@@ -71,16 +98,22 @@ class RingFixture : public ::testing::Test {
   Opened openWith(std::vector<linux_host::UniqueDescriptor> descriptors) {
     return running_.onQueue([&] { return rings_->open(std::move(descriptors)); });
   }
-  std::string declare(std::int64_t shape) {
-    return running_.onQueue([&] {
-      return rings_
-          ->declareShape({{"shape", shape},
-                          {"category", 4},
-                          {"type", 1},
-                          {"keys", plist::Array{"number"}},
-                          {"kinds", plist::Array{"integer"}}})
-          .text();
-    });
+  std::string declare(std::int64_t shape) { return declare(shape, {}); }
+  // For messages to these sessions.
+  std::string declare(std::int64_t shape, const std::vector<std::int64_t>& reporterIDs) {
+    plist::Array ids;
+    for (const std::int64_t id : reporterIDs) {
+      ids.append(id);
+    }
+    plist::Dictionary description{{"shape", shape},
+                                  {"category", 4},
+                                  {"type", 1},
+                                  {"keys", plist::Array{"number"}},
+                                  {"kinds", plist::Array{"integer"}}};
+    if (!reporterIDs.empty()) {
+      description.set("reporterIDs", ids);
+    }
+    return running_.onQueue([&] { return rings_->declareShape(description).text(); });
   }
   bool eventuallyServed(std::size_t count) {
     return eventually([&] { return owner_->count == count; });

@@ -55,6 +55,16 @@ class RecordingService::Client final : public platform::TarnReportingServiceProt
            }
          });
   }
+  void sendMessages(platform::MessageRun& run) override {
+    service_.events.push_back(prefix_ + "run");
+    while (const platform::MessageRun::Message* const message = run.next()) {
+      service_.events.push_back(prefix_ + "message " + plist::description(message->payload->dictionary()["number"]) +
+                                " to " + std::to_string(message->reporterID));
+      service_.receivedThen.push_back(service_.received ? service_.received() : 0);
+      service_.allocate(Short::Working);
+      service_.queue_->spend(service_.runCost);
+    }
+  }
   void stopReportingSessionForID(std::int64_t reporterID, platform::Acknowledge reply) override {
     if (service_.slices == 0) {
       acknowledged("stopReportingSessionForID " + std::to_string(reporterID), std::move(reply));

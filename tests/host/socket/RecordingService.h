@@ -32,9 +32,11 @@ class RecordingService final : public platform::ListenerDelegate,
   bool replyTwice = false;                        // every message is answered twice
   std::size_t replyPadding = 0;                   // bytes of the dictionary that reporterID answers
   std::vector<std::int64_t> reporters{1, -2, 3};  // that getAllReporters answers
-  int slices = 0;                       // a stop is so many events "1 slice" first, each of which may give way
-  std::function<void(int)> onSlice;     // called with how many are left
-  std::map<int, std::size_t> logBytes;  // that the sessions of a client take, by its number
+  int slices = 0;                           // a stop is so many events "1 slice" first, each of which may give way
+  std::function<void(int)> onSlice;         // called with how many are left
+  std::size_t runCost = 0;                  // of each message of a run
+  std::function<std::uint64_t()> received;  // asked with each message of a run
+  std::map<int, std::size_t> logBytes;      // that the sessions of a client take, by its number
   // Where memory is missing from now on.
   enum class Short { Nowhere, Accepting, HandingOver, Working, AfterTheReply, Ending };
   Short shortOfMemory = Short::Nowhere;
@@ -49,7 +51,8 @@ class RecordingService final : public platform::ListenerDelegate,
   std::vector<std::int32_t> processIdentifiers;
   std::vector<std::pair<std::int64_t, std::uint32_t>> openers;  // number and user of each connection
   std::vector<std::string> descriptions;
-  std::size_t mostWaiting = 0;  // pieces of work that waited when a request came
+  std::vector<std::uint64_t> receivedThen;  // what it answered
+  std::size_t mostWaiting = 0;              // pieces of work that waited when a request came
 
  private:
   class Client;
