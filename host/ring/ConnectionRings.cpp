@@ -264,7 +264,8 @@ ConnectionRings::Step ConnectionRings::serveMessage(RingReader& reader, RingOwne
   switch (decodeMessage(record, message)) {
     case ShapeTable::Decoded::UnknownShape:
       // It may be on its way on the socket still.
-      return reader.ending() ? refuseRecord(reader, record, TARNRING_UNKNOWN_SHAPE) : Step::Held;
+      if (!reader.ending()) return Step::Held;
+      return board_.serviceEnds ? Step::Nothing : refuseRecord(reader, record, TARNRING_UNKNOWN_SHAPE);
     case ShapeTable::Decoded::BadValues:
       return refuseRecord(reader, record, TARNRING_BAD_VALUES);
     case ShapeTable::Decoded::Ok:

@@ -78,8 +78,9 @@ class ConnectionRings : public std::enable_shared_from_this<ConnectionRings> {
   Status declareShape(const plist::Dictionary& description);
 
   // Reads what is published by now, then closes all rings and calls `drained`, once, which may be at once. Records that
-  // have to wait for their turn or for room are waited for; messages without their shape are refused. No ring is opened
-  // any more. To be called once.
+  // have to wait for their turn or for room are waited for; messages without their shape are refused, unless it is the
+  // service that ends: then a ring is read up to there, and the rest stays for the next service. No ring is opened any
+  // more. To be called once.
   void end(Drained drained);
 
   // For the board: serves up to a turn's share, beginning with another ring each time, and lets rings that had nothing

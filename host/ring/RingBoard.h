@@ -55,6 +55,8 @@ class RingBoard {
   // As they were given; the connections keep to them.
   const RingLimits limits;
   RingCounts counts;
+  // Set before the connections end because the service does: their clients live on and come again to the next one.
+  bool serviceEnds = false;
   // One for all rings: it keeps nothing between records but scratch space. A record is decoded and handed on before the
   // next one is looked at, so `request` and `refusal` are free again each time.
   wire::RequestDecoder decoder;

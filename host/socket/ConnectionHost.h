@@ -82,6 +82,7 @@ class ConnectionHost {
   void remove(OpenConnection& connection) { open_.erase(&connection); }
   // Ends all connections in order, as when a signal ends the service. They end one after another in later turns.
   void endInputs() {
+    rings.serviceEnds = true;
     for (OpenConnection* connection : open_) {
       connection->endInput();
     }

@@ -40,7 +40,8 @@ CAMPAIGNS = {
     "ringkills": ("ringkills", "SIGKILL to programs that post to rings: what a ring calls posted is there, once"),
     "ringrestarts": ("ringrestarts", "the service ends and starts while programs post to rings: no call fails"),
     "streams": ("streams", "200 streams a minute of a real PipeWire: a session each, as long as it ran, none open"),
-    "restarts": ("restarts", "SIGTERM at random moments under load: all that was answered is there, once"),
+    "ends": ("ends", "SIGTERM at random moments under load: all that was answered is there, once"),
+    "restarts": ("restarts", "restarts with the socket kept, under 5,000 messages a second of the libraries' programs"),
 }
 
 

@@ -6,6 +6,7 @@ import mmap
 import os
 import struct
 import subprocess
+import sys
 import time
 from collections import Counter
 
@@ -14,19 +15,18 @@ from service import PATIENCE, end_with_parent
 
 HEADER_BYTES = 4096
 MAGIC = b"TARNRING"
-POSTED, DROPPED, TAKEN_MESSAGES = 72, 80, 144
+POSTED, DROPPED, TAKEN_MESSAGES, COMMITTED_MESSAGES = 72, 80, 144, 152
 
 
-class Poster:
-    """One ring_poster: a program with so many rings, whose messages have the keys from `key` on."""
+class Program:
+    """A program with rings that posts numbered messages, of one key from each ring, until it is asked to end."""
 
-    def __init__(self, context, service, key, rings):
-        self.keys = range(key, key + rings)
+    def __init__(self, keys, command, environment=None):
+        self.keys = keys
+        self.name = type(self).__name__
         self.process = subprocess.Popen(
-            [os.path.join(context.shims, "ring_poster"), service.socket, str(key), str(rings),
-             str(context.random.randrange(2**31))],
-            stdin=subprocess.DEVNULL, stdout=subprocess.PIPE, stderr=subprocess.PIPE, text=True,
-            preexec_fn=end_with_parent)
+            command, stdin=subprocess.DEVNULL, stdout=subprocess.PIPE, stderr=subprocess.PIPE, text=True,
+            env={**os.environ, **(environment or {})}, preexec_fn=end_with_parent)
         self.process.stdout.readline()
         self.headers = []
 
@@ -55,6 +55,36 @@ class Poster:
         self.process.terminate()
         _, complaints = self.process.communicate(timeout=4 * PATIENCE)
         return self.process.returncode, complaints
+
+
+class Poster(Program):
+    """One ring_poster: a program with so many rings, whose messages have the keys from `key` on; in bursts, or so many
+    a second and ring."""
+
+    def __init__(self, context, service, key, rings, rate=0):
+        super().__init__(range(key, key + rings), [
+            os.path.join(context.shims, "ring_poster"), service.socket, str(key), str(rings),
+            str(context.random.randrange(2**31)), *([str(rate)] if rate else [])])
+
+
+class Player(Program):
+    """One session_player: short sessions one after the other, by the C++ interface."""
+
+    def __init__(self, context, service, key, rate):
+        super().__init__(range(key, key + 1), [os.path.join(context.shims, "session_player"), service.socket, str(key),
+                                               str(context.random.randrange(2**31)), str(rate)])
+
+
+class PythonPoster(Program):
+    """One python_poster: messages of any keys, by the Python package."""
+
+    def __init__(self, context, service, key, rate):
+        program = os.path.join(os.path.dirname(os.path.abspath(__file__)), "python_poster.py")
+        library = os.path.join(context.shims, "..", "..", "clients", "c", "libtarnreporting.so.1")
+        super().__init__(range(key, key + 1),
+                         [sys.executable, "-B", program, service.socket, str(key),
+                          str(context.random.randrange(2**31)), str(rate)],
+                         {"TARNREPORTING_LIBRARY": os.path.abspath(library)})
 
 
 def eventually(holds, patience=PATIENCE):

@@ -16,6 +16,8 @@ PATIENCE = 30
 # A writer that waits for company for a commit naps for a millisecond or two, as does whoever waits for memory.
 LONGEST_NAP = 0.006
 PARENT_DEATH_SIGNAL = 1
+# Becomes the program with what was its standard input as the socket that it is handed, which is for its process alone.
+HAND_OVER = ("/bin/sh", "-c", 'export LISTEN_PID=$$ LISTEN_FDS=1; exec "$@" 3<&0 0</dev/null', "sh")
 LIBC = ctypes.CDLL(None)
 
 
@@ -27,7 +29,8 @@ def end_with_parent():
 class Service:
     """One state directory and one socket, with at most one running service; started as often as a campaign likes."""
 
-    def __init__(self, program, folder, configuration="", environment=None, arguments=(), before=lambda: None):
+    def __init__(self, program, folder, configuration="", environment=None, arguments=(), before=lambda: None,
+                 holds_socket=False):
         self.program, self.folder = program, folder
         os.makedirs(folder, exist_ok=True)
         self.state = os.path.join(folder, "state")
@@ -38,8 +41,16 @@ class Service:
         self.arguments = list(arguments)
         self.before = before  # called in the process, before it becomes the service
         self.process = None
+        self.listener = self.listen() if holds_socket else None
         with open(self.configuration, "w", encoding="utf-8") as file:
             file.write(configuration)
+
+    def listen(self):
+        """A socket that stays while the service ends and starts, as that of a service manager does."""
+        listener = socket.socket(socket.AF_UNIX, socket.SOCK_STREAM)
+        listener.bind(self.socket)
+        listener.listen(4096)
+        return listener
 
     @property
     def store(self):
@@ -52,10 +63,11 @@ class Service:
             os.unlink(path)
         with socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM) as manager, open(self.log, "ab") as log:
             manager.bind(path)
+            command = [self.program, "--state-dir", self.state, "--config", self.configuration, "--log-level", "error",
+                       *self.arguments]
+            command = [*HAND_OVER, *command] if self.listener else [*command, "--socket", self.socket]
             self.process = subprocess.Popen(
-                [self.program, "--socket", self.socket, "--state-dir", self.state, "--config", self.configuration,
-                 "--log-level", "error", *self.arguments],
-                stdin=subprocess.DEVNULL, stdout=log, stderr=log, preexec_fn=self.prepare,
+                command, stdin=self.listener or subprocess.DEVNULL, stdout=log, stderr=log, preexec_fn=self.prepare,
                 env={**os.environ, "NOTIFY_SOCKET": path, **self.environment, **(environment or {})})
             return self.wait_until_ready(manager, patience)
 
@@ -70,7 +82,7 @@ class Service:
                 return True
             waited = time.monotonic() - begun
             # The word to the manager may be what the campaign lets fail.
-            if waited > 1 and self.is_listening():
+            if waited > 1 and self.listener is None and self.is_listening():
                 return True
             if waited > patience:
                 self.kill()

@@ -3,7 +3,8 @@
 // end. Asked to end (SIGTERM) it closes, and says by its status whether any call ever answered something else than done
 // or dropped, or the close left messages.
 //
-// usage: ring_poster SOCKET KEY RINGS SEED    the messages of ring i have campaign_client KEY + i
+// usage: ring_poster SOCKET KEY RINGS SEED [RATE]
+//   the messages of ring i have campaign_client KEY + i; RATE: so many a second and ring, one after the other
 #include <tarnreporting.h>
 
 #include <array>
@@ -33,17 +34,32 @@ void check(int result) {
   }
 }
 
+void postOne(tarnreporting_writer* writer, const tarnreporting_shape* shape, std::int64_t key, std::int64_t& number) {
+  const std::array<tarnreporting_value, 2> values{tarnreporting_integer(key), tarnreporting_integer(number)};
+  const int result = tarnreporting_post(writer, shape, values.data(), values.size());
+  check(result);
+  number += result == TARNREPORTING_OK ? 1 : 0;
+}
+
 void post(tarnreporting_writer* writer, const tarnreporting_shape* shape, std::int64_t key, std::uint64_t seed) {
   std::mt19937_64 random(seed);
   std::int64_t number = kFirstNumber;
   while (!stopping) {
     for (std::uint64_t burst = 1 + random() % 200; burst > 0; --burst) {
-      const std::array<tarnreporting_value, 2> values{tarnreporting_integer(key), tarnreporting_integer(number)};
-      const int result = tarnreporting_post(writer, shape, values.data(), values.size());
-      check(result);
-      number += result == TARNREPORTING_OK ? 1 : 0;
+      postOne(writer, shape, key, number);
     }
     std::this_thread::sleep_for(std::chrono::microseconds(random() % 4000));
+  }
+}
+
+void postSteadily(tarnreporting_writer* writer, const tarnreporting_shape* shape, std::int64_t key,
+                  std::uint64_t rate) {
+  const std::chrono::nanoseconds pause(1000000000 / rate);
+  auto due = std::chrono::steady_clock::now();
+  std::int64_t number = kFirstNumber;
+  while (!stopping) {
+    postOne(writer, shape, key, number);
+    std::this_thread::sleep_until(due += pause);
   }
 }
 
@@ -56,10 +72,11 @@ std::uint64_t number(std::string_view word) {
 }  // namespace
 
 int main(int count, char** words) {
-  if (count != 5) return 64;
+  if (count != 5 && count != 6) return 64;
   const auto key = static_cast<std::int64_t>(number(words[2]));
   const std::uint64_t rings = number(words[3]);
   const std::uint64_t seed = number(words[4]);
+  const std::uint64_t rate = count == 6 ? number(words[5]) : 0;
   std::signal(SIGTERM, [](int) { stopping = true; });
   tarnreporting_client_options options = {};
   options.size = sizeof options;
@@ -79,7 +96,9 @@ int main(int count, char** words) {
     const tarnreporting_writer_options writerOptions = {sizeof writerOptions, kRingBytes, 0};
     tarnreporting_writer* writer = nullptr;
     check(tarnreporting_writer_open(client, &writerOptions, &writer));
-    threads.emplace_back(post, writer, shape, key + static_cast<std::int64_t>(ring), seed + ring);
+    const std::int64_t own = key + static_cast<std::int64_t>(ring);
+    threads.push_back(rate != 0 ? std::thread(postSteadily, writer, shape, own, rate)
+                                : std::thread(post, writer, shape, own, seed + ring));
   }
   std::puts("posting");
   std::fflush(stdout);

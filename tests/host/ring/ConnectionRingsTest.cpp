@@ -268,6 +268,23 @@ TEST_F(ConnectionRingsTest, TheEndOfAConnectionServesWhatWasPosted) {
   EXPECT_EQ(counts().open, 0U);
 }
 
+// The declaration didn't reach the service any more; the client says it again to the next one.
+TEST_F(ConnectionRingsTest, AtTheServicesEndAMessageWithoutItsShapeAndWhatFollowsStayInTheRing) {
+  start();
+  ClientRing ring;
+  ASSERT_EQ(open(ring).error.text(), "");
+  ASSERT_EQ(declare(5), "");
+  ring.message(5, {0});
+  ring.message(6, {1});
+  ring.message(5, {2});
+  running_.onQueue([&] { board_->serviceEnds = true; });
+  EXPECT_TRUE(end());
+  EXPECT_EQ(numbers(), upTo(1));
+  EXPECT_EQ(seen(ring.header()->taken_messages), 1U);
+  EXPECT_EQ(refused(TARNRING_UNKNOWN_SHAPE), 0U);
+  EXPECT_EQ(counts().open, 0U);
+}
+
 TEST_F(ConnectionRingsTest, AClientThatPostsForEverDoesNotKeepItsConnectionFromEnding) {
   start();
   ClientRing ring;

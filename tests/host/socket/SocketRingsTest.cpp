@@ -182,5 +182,16 @@ TEST_F(SocketRingsTest, ARunWaitsWhileNothingIsTaken) {
   EXPECT_EQ(ledger().messagesReceived, 3U);
 }
 
+TEST_F(SocketRingsTest, WhenTheServiceEndsAMessageWithoutItsShapeIsLeftToTheNextOne) {
+  serve();
+  TestClient client(path_);
+  ASSERT_TRUE(open(client));
+  ASSERT_TRUE(ring_.message(5, {1}));
+  running_.onQueue([this] { host_->endInputs(); });
+  EXPECT_TRUE(eventually([this] { return ledger().connectionsOpen == 0; }));
+  EXPECT_EQ(ring::SharedWords::loadAcquire(&ring_.header()->taken), 0U);
+  EXPECT_EQ(ring::SharedWords::loadAcquire(&ring_.header()->refused), 0U);
+}
+
 }  // namespace
 }  // namespace tarn::linux_host
