@@ -1,16 +1,19 @@
 // SPDX-License-Identifier: Apache-2.0
 // A program that plays silence or records, as the tests ask for it: it pauses, and it dawdles in a cycle.
 //
-//   streamer NAME SECONDS [record] [pause=AT,FOR] [dawdle=AT,MILLISECONDS]
+//   streamer NAME SECONDS [record] [pause=AT,FOR] [dawdle=MILLISECONDS]
 //
-// AT and FOR are seconds from when sound first flowed. It prints "flows" then, "paused" and "resumed" when it asks for
-// that, and ends after SECONDS. NAME is its node's and, with org.test. before it, its application's.
+// AT and FOR are seconds from when sound first flowed; it dawdles in the next cycle after SIGUSR1. It tells what it saw
+// of itself, a line each with the time in seconds since 1970: "flows TIME", "paused TIME" and "resumed TIME" when it
+// asks for that, "dawdled SECONDS" after as many, and "ends TIME" after SECONDS. NAME is its node's and, with org.test.
+// before it, its application's.
 #include <pipewire/pipewire.h>
 #include <spa/param/audio/format-utils.h>
 
 #include <atomic>
 #include <charconv>
 #include <chrono>
+#include <csignal>
 #include <cstdio>
 #include <cstring>
 #include <string>
@@ -26,10 +29,9 @@ struct Streamer {
   pw_stream* stream = nullptr;
   double seconds = 1;
   double pauseAt = -1, pauseFor = 0;
-  double dawdleAt = -1, dawdleMilliseconds = 0;
-  std::atomic<std::int64_t> frames{0};
+  double dawdleMilliseconds = 0;
+  std::atomic<bool> shallDawdle{false};
   bool flows = false;
-  bool hasDawdled = false;
 };
 
 double secondsOf(std::string_view text) {
@@ -38,9 +40,15 @@ double secondsOf(std::string_view text) {
   return seconds;
 }
 
-void say(const char* word) {
-  std::puts(word);
+void say(const char* word, double number) {
+  std::printf("%s %.9f\n", word, number);
   std::fflush(stdout);
+}
+
+// By the clock that messages are stamped with.
+void sayNow(const char* word) {
+  const auto now = std::chrono::system_clock::now().time_since_epoch();
+  say(word, std::chrono::duration<double>(now).count());
 }
 
 void after(Streamer& streamer, double seconds, void (*call)(void*, std::uint64_t)) {
@@ -67,29 +75,33 @@ void process(void* data) {
     plane.chunk->offset = 0;
     plane.chunk->stride = kStride;
     plane.chunk->size = frames * kStride;
-    streamer.frames += frames;
   }
-  const double now = static_cast<double>(streamer.frames) / 48000.0;
-  if (!streamer.hasDawdled && streamer.dawdleAt >= 0 && now >= streamer.dawdleAt) {
-    streamer.hasDawdled = true;
+  if (streamer.shallDawdle.exchange(false)) {
+    const auto begun = std::chrono::steady_clock::now();
     std::this_thread::sleep_for(std::chrono::duration<double, std::milli>(streamer.dawdleMilliseconds));
+    say("dawdled", std::chrono::duration<double>(std::chrono::steady_clock::now() - begun).count());
   }
   pw_stream_queue_buffer(streamer.stream, buffer);
 }
 
+void dawdle(void* data, int) {
+  static_cast<Streamer*>(data)->shallDawdle = true;
+}
+
 void end(void* data, std::uint64_t) {
+  sayNow("ends");
   pw_main_loop_quit(static_cast<Streamer*>(data)->loop);
 }
 
 void resume(void* data, std::uint64_t) {
+  sayNow("resumed");
   pw_stream_set_active(static_cast<Streamer*>(data)->stream, true);
-  say("resumed");
 }
 
 void pause(void* data, std::uint64_t) {
   auto& streamer = *static_cast<Streamer*>(data);
+  sayNow("paused");
   pw_stream_set_active(streamer.stream, false);
-  say("paused");
   after(streamer, streamer.pauseFor, &resume);
 }
 
@@ -100,7 +112,7 @@ void stateChanged(void* data, pw_stream_state, pw_stream_state state, const char
   }
   if (state != PW_STREAM_STATE_STREAMING || streamer.flows) return;
   streamer.flows = true;
-  say("flows");
+  sayNow("flows");
   after(streamer, streamer.seconds, &end);
   if (streamer.pauseAt >= 0) {
     after(streamer, streamer.pauseAt, &pause);
@@ -140,12 +152,12 @@ int main(int count, char** words) {
       streamer.pauseAt = secondsOf(two.substr(0, comma));
       streamer.pauseFor = secondsOf(two.substr(comma + 1));
     } else if (word.substr(0, 7) == "dawdle=") {
-      streamer.dawdleAt = secondsOf(two.substr(0, comma));
-      streamer.dawdleMilliseconds = secondsOf(two.substr(comma + 1));
+      streamer.dawdleMilliseconds = secondsOf(two);
     }
   }
   pw_init(nullptr, nullptr);
   streamer.loop = pw_main_loop_new(nullptr);
+  pw_loop_add_signal(pw_main_loop_get_loop(streamer.loop), SIGUSR1, &dawdle, &streamer);
   const std::string application = std::string("org.test.") + words[1];
   static constexpr pw_stream_events kEvents{
       .version = PW_VERSION_STREAM_EVENTS, .state_changed = &stateChanged, .process = &process};

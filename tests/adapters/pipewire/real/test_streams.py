@@ -1,7 +1,7 @@
 # SPDX-License-Identifier: Apache-2.0
 """What was played and what is recorded of it, with a real PipeWire."""
 
-import os
+import signal
 import time
 import unittest
 
@@ -10,9 +10,8 @@ from headless import Headless, eventually
 ROLES = {"Music": "longformaudio", "Movie": "longformaudio", "Game": "nonlongformaudio",
          "Communication": "telephony", "Notification": "alerts", "Accessibility": "systemsounds",
          "Production": "standalone", "": "generic"}
-# By how much a time may be off, in seconds: a machine that does something else meanwhile gets its events late. The
-# campaign `streams` asks for 100 ms.
-TOLERANCE = float(os.environ.get("TARN_TOLERANCE", "0.4"))
+# pw-play writes so far ahead, and lets run out what it wrote.
+LATENCY = 0.1
 # What is ended before it is over; and what makes a segment, which takes more than half a second.
 LONG = 60
 SEGMENT = 0.75
@@ -23,6 +22,11 @@ class Managed(Headless):
         """What tells a route, in the order of time: another sink may have it paused, or not."""
         told = self.messages(session, "Playback.Start") + self.messages(session, "RouteChange.Generic")
         return sorted(told, key=lambda message: message["tarnreporting_timestamp"])
+
+    def volumes(self, name):
+        """What tells a volume, in the order of time: of a stream with one run."""
+        return [message for session in self.sessions(name)
+                for message in self.messages(session, "Playback.Start") + self.messages(session, "Volume.Generic")]
 
     def plays_to(self, name, device):
         self.assertTrue(eventually(lambda: self.routes(self.sessions(name)[0])[-1]["active_devices"] == device))
@@ -40,6 +44,19 @@ class Managed(Headless):
             self.assertEqual(start["active_devices"], "speaker")
             self.assertEqual(start["session_selected_format"], "S16LE 48000 Hz 2 ch")
 
+    def test_what_was_played_is_told_as_when_it_was(self):
+        self.start()
+        streamer = self.streamer("exact", 3)
+        self.finish(streamer)
+        session = self.one("exact")
+        [start] = self.messages(session, "Playback.Start")
+        [stop] = self.messages(session, "Playback.Stop")
+        [summary] = self.messages(session, "Volume.Summary")
+        may = self.tolerance()
+        self.assertAlmostEqual(start["tarnreporting_timestamp"], streamer.saw("flows"), delta=may)
+        self.assertAlmostEqual(stop["tarnreporting_timestamp"], streamer.saw("ends"), delta=may)
+        self.assertAlmostEqual(summary["play_seconds"], streamer.saw("ends") - streamer.saw("flows"), delta=may)
+
     def test_what_was_played_is_as_long_as_it_was(self):
         self.start()
         first = self.play("long", 4)
@@ -56,23 +73,27 @@ class Managed(Headless):
             self.assertAlmostEqual(last["session_duration"], ran, delta=0.001)
             self.assertEqual(summary["active_devices"], "speaker")
             self.assertEqual(summary["KvSessionVolume"], 1)
-            # pw-play lets what it wrote run out, which takes its latency of 100 ms.
-            self.assertGreater(ran, seconds - TOLERANCE, name)
+            self.assertGreater(ran, seconds - self.tolerance(), name)
+            self.assertLess(ran, seconds + LATENCY + self.tolerance(), name)
 
     def test_steps_of_volume_and_mute_are_exact(self):
         self.start()
         player = self.play("steps", LONG, "--volume", "0.125")
-        self.heard("steps")
+        # pw-play sets it when it runs already.
+        self.assertTrue(eventually(lambda: [told for told in self.volumes("steps") if told["volume_linear"] == 0.125]))
+        before = self.volumes("steps")
         for count, step in enumerate(("{ channelVolumes: [ 0.216, 0.027 ], volume: 1.0 }", "{ mute: true }",
-                                      "{ mute: false, channelVolumes: [ 0.421875, 0.421875 ] }"), 1):
+                                      "{ mute: false, channelVolumes: [ 0.421875, 0.421875 ] }"),
+                                      len(before)):
             self.set_props("steps", step)
             self.heard("steps", "Volume.Generic", count)
         self.end(player)
-        session = self.one("steps")
-        [start] = self.messages(session, "Playback.Start")
-        self.assertEqual((start["KvSessionVolume"], start["volume_linear"]), (0.5, 0.125))
+        self.one("steps")
+        told = [(step["KvSessionVolume"], step["volume_linear"]) for step in before]
+        self.assertEqual(told[len(told) - 1:], [(0.5, 0.125)])
+        self.assertIn(told[:len(told) - 1], ([], [(1, 1)]))
         steps = [(step["KvSessionVolume"], step["muted"], step["channel_volumes"])
-                 for step in self.messages(session, "Volume.Generic")]
+                 for step in self.volumes("steps")[len(before):]]
         self.assertEqual(steps, [(0.6, False, "0.216,0.027"), (0, True, "0.216,0.027"),
                                  (0.75, False, "0.421875,0.421875")])
 
@@ -92,7 +113,7 @@ class Managed(Headless):
                           there["device_profile"]), ("bluetooth", "headset", "aac", "a2dp-sink"))
         played = sum(summary["play_seconds"] for summary in self.messages(session, "Volume.Summary"))
         [last] = self.messages(session, "Generic.Stop")
-        self.assertAlmostEqual(played, last["session_duration"], delta=TOLERANCE)
+        self.assertAlmostEqual(played, last["session_duration"], delta=self.tolerance())
 
     def test_another_default_moves_who_follows_it(self):
         self.start()
@@ -110,7 +131,8 @@ class Managed(Headless):
 
     def test_a_recording_is_input(self):
         self.start()
-        self.finish(self.streamer("recorder", 2, "record"))
+        recorder = self.streamer("recorder", 2, "record")
+        self.finish(recorder)
         session = self.one("recorder")
         self.assertEqual(session["service_name"], "standalone")
         [start] = self.messages(session, "Input.Start")
@@ -120,31 +142,41 @@ class Managed(Headless):
         self.assertEqual((summary["active_devices"], start["device_bus"]), ("microphone", "usb"))
         self.assertAlmostEqual(summary["inputrunning_seconds"],
                                stop["tarnreporting_timestamp"] - start["tarnreporting_timestamp"], delta=0.001)
-        self.assertAlmostEqual(summary["inputrunning_seconds"], 2, delta=2 * TOLERANCE)
+        self.assertAlmostEqual(summary["inputrunning_seconds"], recorder.saw("ends") - recorder.saw("flows"),
+                               delta=self.tolerance())
 
     def test_a_pause_is_no_playing(self):
         self.start()
-        self.finish(self.streamer("corked", 5, "pause=1,2"))
+        corked = self.streamer("corked", 5, "pause=1,2")
+        self.finish(corked)
         session = self.one("corked")
         starts = self.messages(session, "Playback.Start")
         stops = self.messages(session, "Playback.Stop")
         self.assertEqual([start["stream_run"] for start in starts], [1, 2])
-        self.assertAlmostEqual(starts[1]["tarnreporting_timestamp"] - stops[0]["tarnreporting_timestamp"], 2,
-                               delta=2 * TOLERANCE)
+        paused = corked.saw("resumed") - corked.saw("paused")
+        self.assertAlmostEqual(starts[1]["tarnreporting_timestamp"] - stops[0]["tarnreporting_timestamp"], paused,
+                               delta=self.tolerance())
         played = [summary["play_seconds"] for summary in self.messages(session, "Volume.Summary")]
         self.assertEqual(len(played), 2)
         [last] = self.messages(session, "Generic.Stop")
         self.assertAlmostEqual(sum(played), last["session_duration"], delta=0.001)
-        self.assertAlmostEqual(sum(played), 3, delta=3 * TOLERANCE)
+        self.assertAlmostEqual(sum(played), corked.saw("ends") - corked.saw("flows") - paused, delta=self.tolerance())
 
     def test_a_stream_that_dawdles_has_an_overload_as_long_as_that(self):
         self.start()
-        self.finish(self.streamer("dawdler", 4, "dawdle=1,500"))
+        dawdler = self.streamer("dawdler", LONG, "dawdle=500")
+        # Only of cycles since the profiler told first is anything known; it tells once a second or so.
+        self.heard("dawdler", "Playback.Setup")
+        dawdler.process.send_signal(signal.SIGUSR1)
+        slept = dawdler.saw("dawdled")
+        self.assertTrue(eventually(lambda: [issue for issue in self.messages(self.sessions("dawdler")[0], "IO.Error")
+                                            if issue["overload_seconds"] > slept / 2]))
+        may = self.tolerance()
+        self.end(dawdler.process)
         session = self.one("dawdler")
         overloads = self.messages(session, "IO.Error")
-        self.assertGreaterEqual(len(overloads), 1)
         longest = max(overloads, key=lambda overload: overload["overload_seconds"])
-        self.assertAlmostEqual(longest["overload_seconds"], 0.5, delta=TOLERANCE)
+        self.assertAlmostEqual(longest["overload_seconds"], slept, delta=may)
         self.assertEqual(longest["issue_type"], "overload")
         setups = self.messages(session, "Playback.Setup")
         self.assertEqual({setup["graph_quantum"] for setup in setups}, {longest["smallest_buffer_frame_size"]})
@@ -154,7 +186,11 @@ class Managed(Headless):
     def test_many_streams_have_a_session_each_and_none_stays_open(self):
         self.start()
         for wave in range(4):
-            self.finish(*[self.play(f"many{wave}-{i}", 0.25) for i in range(5)])
+            players = [self.play(f"many{wave}-{i}", LONG) for i in range(5)]
+            for i, player in enumerate(players):
+                # One that came and went between two looks wouldn't be seen.
+                self.heard(f"many{wave}-{i}")
+                self.end(player, signal.SIGINT)
         self.ended("many%", 20)
         names = [session["application"] for session in self.sessions("many%")]
         self.assertEqual(sorted(names), sorted(f"org.test.many{wave}-{i}" for wave in range(4) for i in range(5)))
@@ -190,7 +226,8 @@ class Unmanaged(Headless):
         summaries = self.messages(session, "Lagoon.Summary")
         self.assertEqual({summary["active_devices"] for summary in summaries}, {"headset,speaker"})
         self.assertAlmostEqual(sum(summary["play_seconds"] for summary in summaries),
-                               stop["tarnreporting_timestamp"] - begun["tarnreporting_timestamp"], delta=TOLERANCE)
+                               stop["tarnreporting_timestamp"] - begun["tarnreporting_timestamp"],
+                               delta=self.tolerance())
 
     def test_a_sink_that_is_destroyed_ends_the_run(self):
         self.start()
