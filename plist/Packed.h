@@ -6,6 +6,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
+#include <string_view>
 
 #include "plist/KeyList.h"
 #include "plist/ValueView.h"
@@ -103,6 +104,13 @@ class Packed {
   static std::size_t sizeOf(const ValueView& value) noexcept;
   // Writes the value, counting a container once more; returns the place after it. `to` must have sizeOf() bytes.
   static std::byte* write(std::byte* to, const ValueView& value) noexcept;
+  // The same for who knows the kind.
+  static std::byte* writeSigned(std::byte* to, std::int64_t value) noexcept;
+  static std::byte* writeUnsigned(std::byte* to, std::uint64_t value) noexcept;
+  static std::byte* writeDouble(std::byte* to, double value) noexcept { return store(to, Tag::Double, value); }
+  static std::byte* writeText(std::byte* to, std::string_view text) noexcept {
+    return writeBytes(to, Tag::Text8, Tag::Text32, text);
+  }
   // The value as a view into the block; containers aren't counted for it.
   static ValueView read(const std::byte* at) noexcept;
   static bool isContainer(const std::byte* at) noexcept { return tagAt(at) >= Tag::Array; }
@@ -144,9 +152,7 @@ class Packed {
     std::memcpy(to + 1, &value, sizeof value);
     return to + 1 + sizeof value;
   }
-  // In as few bytes as hold the value; lengths in one byte up to 255.
-  static std::byte* writeSigned(std::byte* to, std::int64_t value) noexcept;
-  static std::byte* writeUnsigned(std::byte* to, std::uint64_t value) noexcept;
+  // Lengths in one byte up to 255.
   static std::byte* writeBytes(std::byte* to, Tag shortTag, Tag longTag, std::string_view bytes) noexcept;
 };
 

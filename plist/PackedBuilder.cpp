@@ -153,12 +153,28 @@ void PackedBuilder::Draft::begin(std::size_t mostBytes) {
 }
 
 void PackedBuilder::Draft::add(const ValueView& value) noexcept {
-  std::byte* const to = bytes_.data() + used_;
-  used_ += static_cast<std::size_t>(Packed::write(to, value) - to);
+  wrote(Packed::write(next(), value));
+}
+
+void PackedBuilder::Draft::addSigned(std::int64_t value) noexcept {
+  wrote(Packed::writeSigned(next(), value));
+}
+
+void PackedBuilder::Draft::addUnsigned(std::uint64_t value) noexcept {
+  wrote(Packed::writeUnsigned(next(), value));
+}
+
+void PackedBuilder::Draft::addDouble(double value) noexcept {
+  wrote(Packed::writeDouble(next(), value));
+}
+
+void PackedBuilder::Draft::addText(std::string_view text) noexcept {
+  wrote(Packed::writeText(next(), text));
 }
 
 ValueView PackedBuilder::Draft::at(std::size_t index) const noexcept {
   const std::byte* at = bytes_.data();
+  if (index + 1 == keys_->size()) return Packed::read(at + last_);
   for (; index > 0; --index) {
     at += Packed::sizeAt(at);
   }

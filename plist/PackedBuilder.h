@@ -103,19 +103,32 @@ class PackedBuilder::Draft {
   void begin(std::size_t mostBytes);
   // Adds a value that is present.
   void add(const ValueView& value) noexcept;
+  // The same for who knows the kind.
+  void addSigned(std::int64_t value) noexcept;
+  void addUnsigned(std::uint64_t value) noexcept;
+  void addDouble(double value) noexcept;
+  void addText(std::string_view text) noexcept;
   // A key for each value, in their order. The list stays for as long as the draft is looked at.
   void finish(const KeyList& keys) noexcept { keys_ = &keys; }
 
   // Only of a draft that is finished.
   const KeyList& keys() const noexcept { return *keys_; }
-  // The value of a key of the list, by its place there. Walks the values before it.
+  // The value of a key of the list, by its place there. Walks the values before it, but for the last one.
   ValueView at(std::size_t index) const noexcept;
   Dictionary dictionary() const;
 
  private:
   friend class PackedBuilder::Addition;
+  // Where the next value goes, which is the last one then.
+  std::byte* next() noexcept {
+    last_ = used_;
+    return bytes_.data() + used_;
+  }
+  void wrote(const std::byte* end) noexcept { used_ = static_cast<std::size_t>(end - bytes_.data()); }
+
   std::vector<std::byte> bytes_;  // as many as were ever needed
   std::size_t used_ = 0;
+  std::size_t last_ = 0;  // where the last value begins
   const KeyList* keys_ = nullptr;
 };
 

@@ -23,52 +23,50 @@ constexpr std::array<std::string_view, 7> kKindNames{"integer", "unsigned", "dou
 // Walks over the values of a message, each of which takes a multiple of 8 bytes.
 class ValueWords {
  public:
-  explicit ValueWords(std::span<const std::byte> bytes) noexcept : left_(bytes) {}
+  explicit ValueWords(std::span<const std::byte> bytes) noexcept : at_(bytes.data()), end_(at_ + bytes.size()) {}
 
-  bool atEnd() const noexcept { return left_.empty(); }
+  bool atEnd() const noexcept { return at_ == end_; }
   bool take(std::uint64_t& word) noexcept {
-    if (left_.size() < sizeof word) return false;
-    std::memcpy(&word, left_.data(), sizeof word);
-    left_ = left_.subspan(sizeof word);
+    if (left() < sizeof word) return false;
+    std::memcpy(&word, at_, sizeof word);
+    at_ += sizeof word;
     return true;
   }
-  bool takeBytes(std::string_view& bytes) noexcept {
-    std::uint64_t length = 0;
-    if (!take(length) || length > left_.size()) return false;
+  // Of so many bytes, and those that fill them up.
+  bool takeBytes(std::uint64_t length, std::string_view& bytes) noexcept {
+    if (length > left()) return false;
     const std::size_t padded = (static_cast<std::size_t>(length) + 7) / 8 * 8;
-    if (padded > left_.size()) return false;
-    bytes = {reinterpret_cast<const char*>(left_.data()), static_cast<std::size_t>(length)};
-    left_ = left_.subspan(padded);
+    if (padded > left()) return false;
+    bytes = {reinterpret_cast<const char*>(at_), static_cast<std::size_t>(length)};
+    at_ += padded;
     return true;
   }
 
  private:
-  std::span<const std::byte> left_;
+  std::size_t left() const noexcept { return static_cast<std::size_t>(end_ - at_); }
+
+  const std::byte* at_;
+  const std::byte* end_;
 };
 
-bool addString(ValueWords& words, ShapeKind kind, plist::PackedBuilder::Draft& payload) {
-  std::string_view bytes;
-  if (!words.takeBytes(bytes)) return false;
-  if (kind == ShapeKind::Data) {
-    payload.add(plist::DataView{bytes});
-    return true;
-  }
-  payload.add(bytes);
-  return wire::isUtf8(bytes);
-}
-
 bool addValue(ValueWords& words, ShapeKind kind, plist::PackedBuilder::Draft& payload) {
-  if (kind == ShapeKind::Text || kind == ShapeKind::Data) return addString(words, kind, payload);
   std::uint64_t word = 0;
+  std::string_view bytes;
   if (!words.take(word)) return false;
   switch (kind) {
+    case ShapeKind::Integer:
+      payload.addSigned(static_cast<std::int64_t>(word));
+      return true;
     case ShapeKind::Unsigned:
       // One integer has one kind: unsigned only where signed can't hold it.
-      payload.add(std::in_range<std::int64_t>(word) ? plist::ValueView(static_cast<std::int64_t>(word))
-                                                    : plist::ValueView(word));
+      if (std::in_range<std::int64_t>(word)) {
+        payload.addSigned(static_cast<std::int64_t>(word));
+      } else {
+        payload.addUnsigned(word);
+      }
       return true;
     case ShapeKind::Double:
-      payload.add(std::bit_cast<double>(word));
+      payload.addDouble(std::bit_cast<double>(word));
       return true;
     case ShapeKind::Date:
       payload.add(plist::Date{std::bit_cast<double>(word)});
@@ -76,10 +74,16 @@ bool addValue(ValueWords& words, ShapeKind kind, plist::PackedBuilder::Draft& pa
     case ShapeKind::Boolean:
       payload.add(word == 1);
       return word <= 1;
-    default:
-      payload.add(static_cast<std::int64_t>(word));
+    case ShapeKind::Text:
+      if (!words.takeBytes(word, bytes) || !wire::isUtf8(bytes)) return false;
+      payload.addText(bytes);
+      return true;
+    case ShapeKind::Data:
+      if (!words.takeBytes(word, bytes)) return false;
+      payload.add(plist::DataView{bytes});
       return true;
   }
+  return false;
 }
 
 // Bytes that the values of such a content take at most once they are packed, and a time stamp. A text or data takes no
@@ -219,7 +223,7 @@ ShapeTable::Decoded ShapeTable::decode(std::span<const std::byte> content, Messa
   }
   if (!words.atEnd()) return Decoded::BadValues;
   if (shape.addsStamp) {
-    draft_.add(static_cast<double>(head.stamp) / 1e9);
+    draft_.addDouble(static_cast<double>(head.stamp) / 1e9);
   }
   draft_.finish(shape.keys);
   message = {&draft_, shape.category, shape.type, &shape.reporterIDs};

@@ -83,6 +83,34 @@ TEST(PackedDraft, BecomesWhatABuilderMakesOfTheSameValues) {
   }
 }
 
+TEST(PackedDraft, PacksWhatItIsToldTheKindOfLikeAnyOther) {
+  const std::vector<std::int64_t> integers{0, -1, 127, -128, 128, 32767, 32768, -32769, 2147483647, 2147483648};
+  const std::vector<std::string> texts{"", "text", std::string(255, 'x'), std::string(256, 'x')};
+  std::vector<ValueView> values;
+  PackedBuilder::Draft draft;
+  draft.begin(4096);
+  for (const std::int64_t integer : integers) {
+    values.emplace_back(integer);
+    draft.addSigned(integer);
+  }
+  for (const std::uint64_t integer : {std::uint64_t{1}, std::numeric_limits<std::uint64_t>::max()}) {
+    values.emplace_back(integer);
+    draft.addUnsigned(integer);
+  }
+  for (const double number : {0.1, -0.0, 1.7e12}) {
+    values.emplace_back(number);
+    draft.addDouble(number);
+  }
+  for (const std::string& text : texts) {
+    values.emplace_back(text);
+    draft.addText(text);
+  }
+  const KeyList keys = keysFor(values.size());
+  draft.finish(keys);
+  expectTheSame(draft.dictionary(), built(values, keys));
+  EXPECT_EQ(draft.at(values.size() - 1), ValueView(texts.back()));
+}
+
 TEST(PackedDraft, HoldsNothingOfTheOneBefore) {
   const auto values = everyKind();
   const KeyList keys = keysFor(values.size());

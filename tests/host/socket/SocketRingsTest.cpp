@@ -64,6 +64,26 @@ TEST_F(SocketRingsTest, WhatIsPostedAfterLongWorkComesAfterIt) {
   EXPECT_LT(placeOf("1 createReportingSession 8"), placeOf("1 createReportingSession 9"));
 }
 
+TEST_F(SocketRingsTest, AMessageThatIsPostedAfterLongWorkComesAfterIt) {
+  service_->slices = 300;
+  serve();
+  TestClient client(path_);
+  ASSERT_TRUE(open(client) && declare(client, 5, 7));
+  running_.onQueue([this] {
+    post(requestOf(Operation::StopReportingSessionForID, 7));
+    ring_.message(5, {1});
+    post(requestOf(Operation::CreateReportingSession, 8));
+  });
+  ASSERT_TRUE(eventuallyHappens("1 createReportingSession 8"));
+  EXPECT_EQ(handedOver(), 1);
+  const auto all = events();
+  const auto message = std::find_if(all.begin(), all.end(), [](const std::string& event) {
+    return event.starts_with("1 message ") || event.starts_with("1 sendMessage ");
+  });
+  EXPECT_LT(placeOf("1 stopped 7"), message - all.begin());
+  EXPECT_LT(message - all.begin(), placeOf("1 createReportingSession 8"));
+}
+
 TEST_F(SocketRingsTest, LongWorkFromARingLeavesTheOthersTheirTurns) {
   service_->slices = 1000;
   serve();
