@@ -80,7 +80,9 @@ std::string applicationOf(const Properties& node, const Properties& client) {
 
 BeginSession sessionOf(StreamNumber stream, const Properties& node, const Properties& client, const Rules& rules) {
   const std::string_view role = either(node, client, "media.role");
-  BeginSession begin{stream, rules.serviceTypeOf(role), applicationOf(node, client), {}};
+  std::string application = applicationOf(node, client);
+  const std::uint16_t type = rules.serviceTypeOf(role, application);
+  BeginSession begin{stream, type, std::move(application), {}};
   Fields& fields = begin.configuration;
   addText(fields, keys::kMediaClass, textOf(node, "media.class"));
   addText(fields, keys::kMediaRole, role);
