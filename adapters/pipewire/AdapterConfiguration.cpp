@@ -54,13 +54,20 @@ struct Setting {
   std::string_view section;
   std::string_view key;
   Status (*apply)(const toml::node& node, Rules& rules);
+  bool isOfPipeWire = false;  // and nobody else's
 };
 
+// A sound server's stream is that of others, who are told of where they are known.
+std::vector<std::string> soundServers() {
+  return {"pipewire", "pulseaudio", "jackd", "jackdbus"};
+}
+
 constexpr std::string_view kRoles = "roles";
+constexpr std::string_view kTypes = "types";
 constexpr std::array<Setting, 6> kSettings{{
     {"report", "off", [](const toml::node& node, Rules& rules) { return take(node, rules.off); }},
-    {"report", "media_name", [](const toml::node& node, Rules& rules) { return take(node, rules.mediaNames); }},
-    {"report", "profiler", [](const toml::node& node, Rules& rules) { return take(node, rules.profiler); }},
+    {"report", "media_name", [](const toml::node& node, Rules& rules) { return take(node, rules.mediaNames); }, true},
+    {"report", "profiler", [](const toml::node& node, Rules& rules) { return take(node, rules.profiler); }, true},
     {"report", "without_role", [](const toml::node& node, Rules& rules) { return takeType(node, rules.withoutRole); }},
     {"applications", "allow", [](const toml::node& node, Rules& rules) { return take(node, rules.allow); }},
     {"applications", "deny", [](const toml::node& node, Rules& rules) { return take(node, rules.deny); }},
@@ -70,7 +77,7 @@ bool isSection(std::string_view name) {
   for (const Setting& setting : kSettings) {
     if (setting.section == name) return true;
   }
-  return name == kRoles;
+  return name == kRoles || name == kTypes;
 }
 
 // Goes through the file's tables and keeps the complaint that stands first in the file.
@@ -78,6 +85,11 @@ class Reader {
  public:
   Rules rules;
 
+  explicit Reader(Adapter adapter) : isPipeWire_(adapter == Adapter::PipeWire) {
+    if (!isPipeWire_) {
+      rules.deny = soundServers();
+    }
+  }
   void readRoot(const toml::table& root) {
     for (const auto& [name, node] : root) {
       const toml::table* const section = node.as_table();
@@ -118,22 +130,25 @@ class Reader {
   }
   // The code isn't 0 when there is no such setting.
   Status apply(std::string_view section, std::string_view key, const toml::node& node) {
-    if (section == kRoles) return takeType(node, rules.roles[std::string(key)]);
+    if (section == kTypes) return takeType(node, rules.types[std::string(key)]);
+    if (section == kRoles && isPipeWire_) return takeType(node, rules.roles[std::string(key)]);
     for (const Setting& setting : kSettings) {
-      if (setting.section == section && setting.key == key) return setting.apply(node, rules);
+      const bool isKnown = setting.section == section && setting.key == key && (isPipeWire_ || !setting.isOfPipeWire);
+      if (isKnown) return setting.apply(node, rules);
     }
     return Error{ENOENT, {}};
   }
 
+  bool isPipeWire_;
   std::uint64_t line_ = 0;
   std::string text_;
 };
 
 }  // namespace
 
-Result<Rules> parseConfiguration(std::string_view text, std::string_view name) {
+Result<Rules> parseConfiguration(Adapter adapter, std::string_view text, std::string_view name) {
   const toml::parse_result parsed = toml::parse(text);
-  Reader reader;
+  Reader reader(adapter);
   if (parsed) {
     reader.readRoot(parsed.table());
   } else {
@@ -143,7 +158,7 @@ Result<Rules> parseConfiguration(std::string_view text, std::string_view name) {
   return {std::move(reader.rules), {}};
 }
 
-Result<Rules> readConfiguration(const std::string& path) {
+Result<Rules> readConfiguration(Adapter adapter, const std::string& path) {
   std::ifstream file(path, std::ios::binary);
   std::string text;
   char block[4096];
@@ -155,7 +170,7 @@ Result<Rules> readConfiguration(const std::string& path) {
     const int code = file.is_open() ? EFBIG : errno != 0 ? errno : EIO;
     return {{}, Error{code, path + ": " + std::generic_category().message(code)}};
   }
-  return parseConfiguration(text, path);
+  return parseConfiguration(adapter, text, path);
 }
 
 }  // namespace tarn::streams

@@ -13,17 +13,18 @@ namespace tarn::streams {
 // Threads: any.
 class AdapterLog {
  public:
-  explicit AdapterLog(LogLevel least) : least_(least) {}
+  AdapterLog(Adapter adapter, LogLevel least) : adapter_(adapter), least_(least) {}
 
   void write(LogLevel level, const std::string& text) const {
     if (level < least_) return;
-    std::string line = "tarnreporting-pipewire: ";
+    std::string line = programOf(adapter_) + std::string(": ");
     plist::appendPrintable(line, text, plist::LineEnds::Escaped);
     line += '\n';
     std::fputs(line.c_str(), stderr);
   }
 
  private:
+  Adapter adapter_;
   LogLevel least_;
 };
 

@@ -16,15 +16,13 @@ namespace tarn::streams {
 
 namespace {
 
-// What the end of the program waits for at the most, so that the service has taken everything.
-constexpr std::uint32_t kCloseMilliseconds = 2000;
 constexpr long kFirstPauseMilliseconds = 125;
 constexpr int kMostDoublings = 5;
 
 }  // namespace
 
 Program::Program(const AdapterOptions& options, const Rules& rules)
-    : options_(options), log_(options.logLevel), book_(rules) {
+    : options_(options), log_(Adapter::PipeWire, options.logLevel), outlet_(options_, log_), book_(rules) {
   loop_ = pw_main_loop_new(nullptr);
   // Of PipeWire's own configuration nothing is needed, and its modules would take memory and a data thread's rank.
   pw_properties* const properties = pw_properties_new(PW_KEY_CONFIG_NAME, "null", nullptr);
@@ -46,26 +44,13 @@ Program::~Program() {
 }
 
 int Program::run() {
-  if (!open()) return kExitFailure;
-  if (!options_.print) {
-    reporter_ = std::make_unique<Reporter>();
-    if (const Status opened = reporter_->open(options_.socket); opened.failed()) {
-      log_.write(LogLevel::Error, "can't report: " + opened->text);
-      return kExitFailure;
-    }
-  }
+  if (!open() || !outlet_.open()) return kExitFailure;
   connect();
   if (status_ == 0) {
     pw_main_loop_run(loop_);
   }
   forgetGraph();
-  if (reporter_) {
-    tellLosses();
-    const std::uint64_t left = reporter_->close(kCloseMilliseconds);
-    if (left > 0) {
-      log_.write(LogLevel::Default, std::to_string(left) + " messages were left, since no service took them");
-    }
-  }
+  outlet_.close();
   return status_;
 }
 
@@ -138,30 +123,7 @@ void Program::forgetGraph() {
 }
 
 void Program::carryOut() {
-  const Actions actions = book_.take();
-  if (options_.once || actions.empty()) return;
-  if (reporter_) {
-    reporter_->carryOut(actions);
-    tellLosses();
-    return;
-  }
-  for (const Action& action : actions) {
-    std::fputs(scriptOf(action).c_str(), stdout);
-  }
-  std::fflush(stdout);
-}
-
-// The first, and then whenever they have doubled.
-void Program::tellLosses() {
-  const Reporter::Counts& counts = reporter_->counts();
-  const std::uint64_t refused = reporter_->refused();
-  const std::uint64_t losses = counts.lost + counts.leftOut + refused;
-  if (losses == 0 || losses < 2 * toldLosses_) return;
-  toldLosses_ = losses;
-  const std::string why = counts.lastRefusal.empty() ? reporter_->lastError() : counts.lastRefusal;
-  log_.write(LogLevel::Default, "not reported so far: " + std::to_string(counts.lost) + " messages, " +
-                                    std::to_string(counts.leftOut) + " sessions while no service answered, " +
-                                    std::to_string(refused) + " requests that it refused (" + why + ")");
+  outlet_.carryOut(book_.take());
 }
 
 void Program::stop(int status) {

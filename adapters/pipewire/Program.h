@@ -10,9 +10,9 @@
 #include <memory>
 #include <string>
 
+#include "adapters/pipewire/ActionOutlet.h"
 #include "adapters/pipewire/AdapterLog.h"
 #include "adapters/pipewire/AdapterOptions.h"
-#include "adapters/pipewire/Reporter.h"
 #include "adapters/pipewire/core/Rules.h"
 #include "adapters/pipewire/core/StreamBook.h"
 #include "adapters/pipewire/graph/GraphWatcher.h"
@@ -39,23 +39,21 @@ class Program final : private GraphWatcher::Listener {
   void connectLater();
   void forgetGraph();
   void carryOut();
-  void tellLosses();
   void stop(int status);
   static void signalled(void* data, int);
   static void due(void* data, std::uint64_t);
 
   const AdapterOptions options_;
   AdapterLog log_;
+  ActionOutlet outlet_;
   StreamBook book_;
   pw_main_loop* loop_ = nullptr;
   pw_context* context_ = nullptr;
   spa_source* timer_ = nullptr;
   std::unique_ptr<GraphWatcher> watcher_;
-  std::unique_ptr<Reporter> reporter_;  // null: what is said is printed
   int status_ = 0;
   int attempts_ = 0;     // to connect, since the last that succeeded
   bool isLost_ = false;  // and what is left of the connection is yet to go
-  std::uint64_t toldLosses_ = 0;
 };
 
 }  // namespace tarn::streams

@@ -40,6 +40,13 @@ std::optional<std::uint64_t> wholeNumber(std::string_view text) {
                                                                                           : std::nullopt;
 }
 
+// The number that the text begins with, as of "44100 (44100/1)".
+std::uint32_t firstNumber(std::string_view text) {
+  std::uint32_t number = 0;
+  std::from_chars(text.data(), text.data() + text.size(), number);
+  return number;
+}
+
 // "4242.000000042": seconds and nine digits of nanoseconds. All zeros: there was no such moment yet.
 std::optional<std::int64_t> nanoseconds(std::string_view text) {
   const std::size_t point = std::min(text.find('.'), text.size());
@@ -78,6 +85,8 @@ std::optional<AlsaStatus> parseAlsaStatus(std::string_view text) {
       status.hardwarePointer = wholeNumber(value);
     } else if (key == "xrun_counter") {
       status.overruns = wholeNumber(value);
+    } else if (key == "owner_pid") {
+      status.owner = wholeNumber(value);
     }
   });
   return told ? std::optional(status) : std::nullopt;
@@ -95,6 +104,26 @@ std::optional<AlsaInfo> parseAlsaInfo(std::string_view text) {
     }
   });
   return told ? std::optional(info) : std::nullopt;
+}
+
+std::optional<AlsaParameters> parseAlsaParameters(std::string_view text) {
+  AlsaParameters parameters;
+  forEachLine(text, [&](std::string_view key, std::string_view value) {
+    if (key == "format") {
+      parameters.format = alsaName(value);
+    } else if (key == "channels") {
+      parameters.channels = firstNumber(value);
+    } else if (key == "rate") {
+      parameters.rate = firstNumber(value);
+    } else if (key == "period_size") {
+      parameters.periodFrames = firstNumber(value);
+    } else if (key == "buffer_size") {
+      parameters.bufferFrames = firstNumber(value);
+    }
+  });
+  const bool isWhole = !parameters.format.empty() && parameters.channels != 0 && parameters.rate != 0 &&
+                       parameters.periodFrames != 0 && parameters.bufferFrames != 0;
+  return isWhole ? std::optional(parameters) : std::nullopt;
 }
 
 std::string alsaName(std::string_view text) {

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-// The kernel's texts on a PCM substream, /proc/asound/card*/pcm*/sub*/: its "status" and its "info".
+// The kernel's texts on a PCM substream, /proc/asound/card*/pcm*/sub*/: its "status", its "info" and its "hw_params".
 //
 //   closed                              one word while nobody has it open, else lines "key: value":
 //
@@ -14,6 +14,13 @@
 //   hw_ptr      : 363636                frames that the hardware has passed since the stream was prepared
 //   appl_ptr    : 364148
 //   xrun_counter: 2                     since it was opened; only of a kernel that counts them
+//
+//   access: RW_INTERLEAVED              its parameters: "closed" or "no setup" while there are none
+//   format: S16_LE
+//   channels: 2
+//   rate: 44100 (44100/1)
+//   period_size: 1024                   frames
+//   buffer_size: 4096
 //
 // Lines may come in any order, and others are passed over. Threads: any. Nothing is thrown.
 #pragma once
@@ -42,6 +49,7 @@ struct AlsaStatus {
   std::optional<std::int64_t> nowNanoseconds;      // by the same one
   std::optional<std::uint64_t> hardwarePointer;    // frames
   std::optional<std::uint64_t> overruns;           // none: the kernel doesn't tell
+  std::optional<std::uint64_t> owner;              // the thread that has it open
 };
 
 struct AlsaInfo {
@@ -49,10 +57,22 @@ struct AlsaInfo {
   std::string id;  // "ALC287 Analog"; printable ASCII, bounded
 };
 
+// How sound is passed to or from the hardware.
+struct AlsaParameters {
+  std::string format;  // S16_LE
+  std::uint32_t channels = 0;
+  std::uint32_t rate = 0;
+  std::uint32_t periodFrames = 0;
+  std::uint32_t bufferFrames = 0;
+  bool operator==(const AlsaParameters&) const = default;
+};
+
 // Nothing when the text tells no state, as when it was cut. Of a key that stands twice the last one counts.
 std::optional<AlsaStatus> parseAlsaStatus(std::string_view text);
 // Nothing when the text tells no direction ("stream: PLAYBACK" or "CAPTURE").
 std::optional<AlsaInfo> parseAlsaInfo(std::string_view text);
+// Nothing while nothing is set up, and when format, channels, rate or a size are missing or no numbers.
+std::optional<AlsaParameters> parseAlsaParameters(std::string_view text);
 // A name of the kernel's that is safe everywhere: its first line, at most 80 bytes, without blanks at its ends,
 // printable ASCII with "?" for anything else. It becomes part of a channel's name and of log lines.
 std::string alsaName(std::string_view text);

@@ -98,6 +98,23 @@ class Code(unittest.TestCase):
     def test_a_table_that_holds_what_the_code_names_is_fine(self):
         self.assertEqual(found(tree()), [])
 
+    def test_what_an_adapter_says_is_in_the_table_by_its_constant_or_a_literal(self):
+        adapter = dictionary.ADAPTERS + "StreamMessages.cpp"
+        part = '[[part]]\nname = "Adapters"\ntext = "They."\nfiles = ["%s"]\n\n' % adapter
+        muted = ('[[key]]\nname = "muted"\nsection = "Streams"\nkind = "boolean"\nwriters = ["Adapters"]\n'
+                 'text = "It is."\n\n')
+        table = TABLE.replace("[[derived]]", part + muted + "[[derived]]", 1)
+        for source, wrong in (("fields.push_back({keys::kMuted, true});", None),
+                              ('fields.push_back({"muted", true});', None),
+                              ("keys::kMuted; addText(fields, keys::kLouder, text);", "Louder is no key of " + PATH),
+                              ('keys::kMuted; addText(made.fields, "louder", text);', "louder is no key of " + PATH),
+                              ('keys::kMuted; keys::kVolume;', f"no part that {PATH} names for volume has this file"),
+                              ("nothing();", "no file of Adapters knows muted")):
+            a_tree = tree(table)
+            a_tree.files[adapter] = "\n" + source + "\n"
+            texts = [text for _, _, text in found(a_tree)]
+            self.assertEqual(texts, [wrong] if wrong else [], source)
+
     def test_a_missing_table_is_reported(self):
         self.assertEqual([finding[:2] for finding in found(Tree({WORKER: SOURCE}))], [(PATH, 1)])
 

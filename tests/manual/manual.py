@@ -43,9 +43,10 @@ class Table(unittest.TestCase):
         with open(TABLE, encoding="utf-8") as file:
             self.assertEqual(file.read(), told.stdout, "write it anew: build/bin/tarnreportingcommands > " + TABLE)
 
-    def test_it_has_both_programs_with_their_options(self):
+    def test_it_has_all_programs_with_their_options(self):
         programs = pages.commands()
-        self.assertEqual(sorted(programs), ["tarnreportingctl", "tarnreportingd"])
+        self.assertEqual(sorted(programs),
+                         ["tarnreporting-alsa", "tarnreporting-pipewire", "tarnreportingctl", "tarnreportingd"])
         self.assertGreater(len(programs["tarnreportingctl"]["commands"]), 10)
         self.assertIn("--state-dir", completions.names(programs["tarnreportingd"]))
 
@@ -53,11 +54,13 @@ class Table(unittest.TestCase):
 class Pages(unittest.TestCase):
     def test_there_is_one_for_each_thing_that_somebody_looks_up(self):
         self.assertEqual([os.path.basename(path)[:-3] for path in templates()], [
-            "libtarnreporting.3", "tarnreporting-schema.5", "tarnreporting-wire.7", "tarnreporting.7",
+            "libtarnreporting.3", "tarnreporting-alsa.1", "tarnreporting-pipewire.1", "tarnreporting-schema.5",
+            "tarnreporting-wire.7", "tarnreporting.7",
             "tarnreportingctl.1", "tarnreportingd.8", "tarnreportingd.toml.5"])
 
     def test_every_option_and_every_command_stands_in_the_page_of_its_program(self):
-        for name, section in (("tarnreportingd", 8), ("tarnreportingctl", 1)):
+        for name in pages.commands():
+            section = 8 if name == "tarnreportingd" else 1
             text = pages.scdoc(pages.expanded(os.path.join(SOURCE, "docs", "manual", f"{name}.{section}.md")))
             for command in every(pages.commands()[name]):
                 self.assertIn(command["name"], text)

@@ -104,16 +104,25 @@ class InstalledTree(unittest.TestCase):
             self.assertIn("u " + service["User"][0] + " ", file.read())
         self.assertEqual(sockets["SocketUser"], service["User"])
 
-    def test_the_adapter_comes_with_its_unit_or_not_at_all(self):
-        program, unit = self.at("bin", "tarnreporting-pipewire"), "lib/systemd/user/tarnreporting-pipewire.service"
+    def adapter_settings(self, name):
+        """Of its unit, which comes with it; none where the adapter isn't there."""
+        program, unit = self.at("bin", name), f"lib/systemd/user/{name}.service"
         self.assertEqual(os.path.exists(self.at(unit)), os.path.exists(program))
         if not os.path.exists(program):
-            return
+            return None
         done = run(program, "--help")
         self.assertEqual((done.returncode, "--print" in done.stdout), (0, True), done.stderr)
         settings = self.settings(unit)
         self.assertEqual(shlex.split(settings["ExecStart"][0]), [program])
-        self.assertEqual((settings["BindsTo"], settings["WantedBy"]), (["pipewire.service"], ["pipewire.service"]))
+        self.assertEqual(settings["Documentation"], [f"man:{name}(1)"])
+        return settings
+
+    def test_the_adapter_for_pipewire_comes_and_goes_with_it_or_is_not_there_at_all(self):
+        if settings := self.adapter_settings("tarnreporting-pipewire"):
+            self.assertEqual((settings["BindsTo"], settings["WantedBy"]), (["pipewire.service"], ["pipewire.service"]))
+
+    def test_the_adapter_for_alsa_is_always_there(self):
+        self.assertEqual(self.adapter_settings("tarnreporting-alsa")["WantedBy"], ["default.target"])
 
     def test_the_installed_configuration_is_read_and_may_be_absent(self):
         path = self.at("etc/tarnreporting/tarnreportingd.toml")

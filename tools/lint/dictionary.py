@@ -3,6 +3,9 @@
 file; each part that an entry names is there, and one of its files knows the key; the numbers are those of the
 vocabulary; and what is made from the table is current.
 
+What adapters say is clients' talk, and named by the constants that are made from the table, or by a literal: these keys
+too are in the table, under a part that has the file.
+
 A key is named by a plist::Key, by what stands in the brackets or the first place of a dictionary's operation, and by a
 member of a dictionary, or of the list of watched settings, that is written out; as a literal or by a constant.
 """
@@ -16,9 +19,10 @@ from tree import TOKEN, Finding
 sys.path.insert(0, os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "dictionary"))
 
 from generate import made  # noqa: E402
-from table import PATH, Fault, load  # noqa: E402
+from table import PATH, Fault, load, pascal  # noqa: E402
 
-FOLDERS = ("session/", "derived/", "diagnostics/", "telemetry/", "service/")
+ADAPTERS = "adapters/pipewire/core/"
+FOLDERS = ("session/", "derived/", "diagnostics/", "telemetry/", "service/", ADAPTERS)
 VOCABULARY = "service/vocabulary/TarnReportingVocabulary.h"
 CLASSES = "service/TarnReportingWorkerClasses.cpp"
 # (file, key): what it is, which is no part of a message.
@@ -42,6 +46,8 @@ USED = re.compile(r"(?:(?:\.|->)(?:get|set|contains|remove|hasKeyWithPrefix)\(\s
 COMPUTED = re.compile(r"\bgetDriverStatsKey\([^\"();]*,\s*\"(\w+)\"\)")
 WRITTEN_OUT = re.compile(r"\b(?:Dictionary|array<Feature, \d+>)(?:\s+\w+)?\s*\{")
 MEMBER = re.compile(r"\{\s*(?:\"([^\"]+)\"(\s*\+\s*\w+)?|(" + NAME + r"))\s*,")
+# A field of what an adapter says: {keys::kMuted, ...}, addText(fields, "muted", ...).
+SAID = re.compile(r"\bkeys::k(\w+)|(?:push_back\(\{|\badd(?:Text|Number)\([\w.]+,)\s*\"([^\"]+)\"")
 ENUMERATOR = re.compile(r"(\w+)\s*=\s*(0x[0-9A-Fa-f]+|\d+)")
 WORKER = re.compile(r"\bTarnReportingSession\w+Worker\b(?!\.h|Class)")
 
@@ -53,7 +59,7 @@ def check(tree):
         table = load(tree.files[PATH])
     except Fault as fault:
         return [Finding(PATH, line_of(tree, str(fault).partition(" ")[2].partition(":")[0]), str(fault))]
-    found = keys_named(tree)
+    found = sorted(keys_named(tree) + keys_said(tree, table))
     return sorted(unknown_keys(table, found) + idle_parts(tree, table, found) + wrong_numbers(tree, table)
                   + missing_parts(tree, table) + stale(tree))
 
@@ -143,6 +149,16 @@ def keys_named(tree):
     for path, text in texts.items():
         constants = {**shared, **{name: key for pattern in (DECLARED, TEXT) for name, key in pattern.findall(text)}}
         found.update((path, text.count("\n", 0, at) + 1, key) for at, key in keys_in(text, constants, shared, path))
+    return sorted(found)
+
+
+def keys_said(tree, table):
+    """(file, line, key) for each key of what adapters say; of a constant that there isn't, its name."""
+    names = {pascal(entry.name): entry.name for entry in table.keys if entry.is_constant()}
+    found = {(path, text.count("\n", 0, match.start()) + 1, names.get(match.group(1), match.group(1)) or match.group(2))
+             for path, text in ((path, without_comments(text)) for path, text in tree.cxx().items()
+                                if path.startswith(ADAPTERS))
+             for match in SAID.finditer(text)}
     return sorted(found)
 
 

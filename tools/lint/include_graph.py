@@ -69,6 +69,8 @@ ROOMS = {
     "adapters/pipewire/core": (),
     "adapters/pipewire/graph": ("adapters/pipewire/core",),
     "adapters/pipewire": VALUES + ("adapters/pipewire/core", "adapters/pipewire/graph", "host/settings"),
+    # The same of ALSA, whose sub-devices are streams by the same model.
+    "adapters/alsa": VALUES + ("adapters/pipewire/core", "adapters/pipewire", "host/drivers"),
     "testing/backends": BASE,
     "testing": BASE + ("service/vocabulary", "testing/backends"),
     "tools/script": PROGRAM,
@@ -78,7 +80,7 @@ ROOMS = {
     "tools/ctl": PROGRAM + ("client", "dictionary", "tools/script", "tools/ctl/terminal"),
     "tools/ctl/sessions": PROGRAM + ("tools/ctl", "tools/ctl/terminal", "tools/report", "tools/script"),
     "tools/ctl/views": PROGRAM + ("client", "tools/ctl", "tools/ctl/terminal", "tools/report"),
-    "tools/manual": PROGRAM + ("tools/ctl",),
+    "tools/manual": PROGRAM + ("tools/ctl", "adapters/pipewire"),
     # What checks the service shares no code with it, but for the client and the reader of the recorder's file.
     "tests/scenario": VALUES + ("client", "wire", "recorder/store/rows", "recorder/store", "recorder/store/reading"),
 }

@@ -1,12 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
-// tarnreportingcommands: prints the commands and options of tarnreportingd and tarnreportingctl as JSON, from the very
-// tables that the two parse with. docs/manual/commands.json keeps it; manual pages and completions are made of that.
+// tarnreportingcommands: prints the commands and options of our programs as JSON, from the very tables that they parse
+// with. docs/manual/commands.json keeps it; manual pages and completions are made of that.
 #include <CLI/CLI.hpp>
 #include <iostream>
 #include <nlohmann/json.hpp>
 #include <sstream>
 #include <string>
 
+#include "adapters/pipewire/AdapterOptions.h"
 #include "host/settings/ServiceOptions.h"
 #include "tools/ctl/Command.h"
 #include "tools/ctl/CommandLine.h"
@@ -75,6 +76,13 @@ Json serviceJson() {
   return commandJson(app);
 }
 
+Json adapterJson(streams::Adapter adapter) {
+  CLI::App app;
+  streams::AdapterOptionTexts texts;
+  streams::describeAdapterCommand(adapter, app, texts);
+  return commandJson(app);
+}
+
 Json toolJson() {
   CLI::App app;
   ctl::Context context;
@@ -87,6 +95,9 @@ Json toolJson() {
 }  // namespace tarn
 
 int main() {
-  std::cout << tarn::Json::array({tarn::serviceJson(), tarn::toolJson()}).dump(1) << '\n';
+  using tarn::streams::Adapter;
+  const auto programs = tarn::Json::array(
+      {tarn::serviceJson(), tarn::toolJson(), tarn::adapterJson(Adapter::Alsa), tarn::adapterJson(Adapter::PipeWire)});
+  std::cout << programs.dump(1) << '\n';
   return std::cout.good() ? 0 : 1;
 }

@@ -3,10 +3,13 @@
 
 #include <charconv>
 #include <cstdio>
+#include <tarnreporting_messages.hpp>
 
 namespace tarn::streams {
 
 namespace {
+
+namespace keys = tarnreporting::keys;
 
 constexpr std::size_t kAddressLength = 17;  // six pairs of digits and what is between them
 constexpr std::size_t kMostText = 1024;     // that a report may carry
@@ -77,21 +80,23 @@ std::string applicationOf(const Properties& node, const Properties& client) {
 
 BeginSession sessionOf(StreamNumber stream, const Properties& node, const Properties& client, const Rules& rules) {
   const std::string_view role = either(node, client, "media.role");
-  BeginSession begin{stream, rules.serviceTypeOf(role), applicationOf(node, client), {}};
+  std::string application = applicationOf(node, client);
+  const std::uint16_t type = rules.serviceTypeOf(role, application);
+  BeginSession begin{stream, type, std::move(application), {}};
   Fields& fields = begin.configuration;
-  addText(fields, "media_class", textOf(node, "media.class"));
-  addText(fields, "media_role", role);
-  addText(fields, "stream_node", textOf(node, "node.name"));
-  addText(fields, "application_process_binary", either(node, client, "application.process.binary"));
+  addText(fields, keys::kMediaClass, textOf(node, "media.class"));
+  addText(fields, keys::kMediaRole, role);
+  addText(fields, keys::kStreamNode, textOf(node, "node.name"));
+  addText(fields, keys::kApplicationProcessBinary, either(node, client, "application.process.binary"));
   std::string_view process = either(node, client, "application.process.id");
   if (process.empty()) {
     process = textOf(client, "pipewire.sec.pid");
   }
-  addNumber(fields, "application_process_id", process);
-  addText(fields, "portal_app_id", either(node, client, "pipewire.access.portal.app_id"));
-  addText(fields, "requested_latency", textOf(node, "node.latency"));
+  addNumber(fields, keys::kApplicationProcessId, process);
+  addText(fields, keys::kPortalAppId, either(node, client, "pipewire.access.portal.app_id"));
+  addText(fields, keys::kRequestedLatency, textOf(node, "node.latency"));
   if (rules.mediaNames) {
-    addText(fields, "media_name", textOf(node, "media.name"));
+    addText(fields, keys::kMediaName, textOf(node, "media.name"));
   }
   return begin;
 }

@@ -90,9 +90,11 @@ bool Rules::mayReport(std::string_view application) const {
   return !off && !matchesAny(deny, application) && matchesAny(allow, application);
 }
 
-std::uint16_t Rules::serviceTypeOf(std::string_view role) const {
-  const auto found = roles.find(role);
-  return found == roles.end() ? withoutRole : found->second;
+std::uint16_t Rules::serviceTypeOf(std::string_view role, std::string_view application) const {
+  if (const auto found = roles.find(role); found != roles.end()) return found->second;
+  const auto type = std::find_if(types.begin(), types.end(),
+                                 [application](const auto& row) { return matchesGlob(row.first, application); });
+  return type == types.end() ? withoutRole : type->second;
 }
 
 }  // namespace tarn::streams

@@ -31,11 +31,12 @@ struct Rules {
   std::vector<std::string> allow{"*"};  // applications, as patterns
   std::vector<std::string> deny;        // likewise; it goes before `allow`
   RoleTable roles = defaultRoles();
-  std::uint16_t withoutRole = 0;  // generic: streams whose role is missing or in no row
+  RoleTable types;                // of applications, as patterns, for streams whose role is missing or in no row
+  std::uint16_t withoutRole = 0;  // generic: the other ones
 
   static RoleTable defaultRoles();
   bool mayReport(std::string_view application) const;
-  std::uint16_t serviceTypeOf(std::string_view role) const;
+  std::uint16_t serviceTypeOf(std::string_view role, std::string_view application) const;
 };
 
 }  // namespace tarn::streams

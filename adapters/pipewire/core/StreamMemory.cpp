@@ -41,7 +41,7 @@ void StreamMemory::remember(const PostMessage& post) {
 std::optional<PostMessage> StreamMemory::restatement() const {
   std::optional<PostMessage> restated = run_;
   if (restated) {
-    restated->fields.push_back({"restated", true});
+    restated->fields.push_back({keys::kRestated, true});
   }
   return restated;
 }

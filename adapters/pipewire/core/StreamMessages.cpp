@@ -19,7 +19,7 @@ PostMessage message(const Occasion& occasion, Category category, Type type) {
   PostMessage made{
       occasion.stream, static_cast<std::uint32_t>(category), static_cast<std::uint16_t>(type), occasion.at, {}};
   if (occasion.run > 0) {
-    made.fields.push_back({"stream_run", occasion.run});
+    made.fields.push_back({keys::kStreamRun, occasion.run});
   }
   return made;
 }
@@ -41,25 +41,25 @@ void addText(Fields& fields, std::string_view key, const std::string& text) {
 void addSound(Fields& fields, const StreamFacts& facts) {
   if (facts.sound) {
     fields.push_back({keys::kKvSessionVolume, facts.sound->muted ? 0.0 : facts.sound->slider});
-    fields.push_back({"volume_linear", facts.sound->linear});
-    fields.push_back({"muted", facts.sound->muted});
-    addText(fields, "channel_volumes", facts.sound->channels);
+    fields.push_back({keys::kVolumeLinear, facts.sound->linear});
+    fields.push_back({keys::kMuted, facts.sound->muted});
+    addText(fields, keys::kChannelVolumes, facts.sound->channels);
   }
   if (facts.route.volume) {
-    fields.push_back({"device_volume", *facts.route.volume});
-    fields.push_back({"device_muted", facts.route.muted});
+    fields.push_back({keys::kDeviceVolume, *facts.route.volume});
+    fields.push_back({keys::kDeviceMuted, facts.route.muted});
   }
 }
 
 void addRoute(Fields& fields, const Route& route) {
   fields.push_back({keys::kActiveDevices, route.devices.empty() ? std::string("none") : route.devices});
-  addText(fields, "device_bus", route.buses);
-  addText(fields, "device_port", route.ports);
-  addText(fields, "device_port_type", route.portTypes);
-  addText(fields, "device_form_factor", route.formFactors);
-  addText(fields, "device_profile", route.profiles);
-  addText(fields, "bluetooth_codec", route.codec);
-  fields.push_back({"device_is_default", route.isDefault});
+  addText(fields, keys::kDeviceBus, route.buses);
+  addText(fields, keys::kDevicePort, route.ports);
+  addText(fields, keys::kDevicePortType, route.portTypes);
+  addText(fields, keys::kDeviceFormFactor, route.formFactors);
+  addText(fields, keys::kDeviceProfile, route.profiles);
+  addText(fields, keys::kBluetoothCodec, route.codec);
+  fields.push_back({keys::kDeviceIsDefault, route.isDefault});
 }
 
 void addFormat(Fields& fields, const std::optional<FormatFacts>& format) {
@@ -67,7 +67,7 @@ void addFormat(Fields& fields, const std::optional<FormatFacts>& format) {
   fields.push_back({keys::kSessionSelectedFormat, formatText(*format)});
   fields.push_back({keys::kMFormatID, format->name});
   fields.push_back({keys::kMChannelsPerFrame, static_cast<std::int64_t>(format->channels)});
-  fields.push_back({"sample_rate", static_cast<std::int64_t>(format->rate)});
+  fields.push_back({keys::kSampleRate, static_cast<std::int64_t>(format->rate)});
 }
 
 // A recording's voice codec is that of the device. The service tells a codec of a run only where it came up anew, so
@@ -133,7 +133,7 @@ PostMessage routeMessage(const Occasion& occasion, const Route& route) {
 PostMessage groupMessage(const Occasion& occasion, const StreamFacts& facts) {
   PostMessage made = message(occasion, Category::Lagoon, facts.route.count > 1 ? Type::Start : Type::Stop);
   addGroup(made.fields, facts.route);
-  made.fields.push_back({"device_count", static_cast<std::int64_t>(facts.route.count)});
+  made.fields.push_back({keys::kDeviceCount, static_cast<std::int64_t>(facts.route.count)});
   return made;
 }
 
@@ -141,9 +141,9 @@ PostMessage setupMessage(const Occasion& occasion, const StreamFacts& facts) {
   PostMessage made = message(occasion, sideOf(occasion), Type::Setup);
   addFormat(made.fields, facts.format);
   if (facts.quantum.frames > 0) {
-    made.fields.push_back({"graph_quantum", facts.quantum.frames});
-    made.fields.push_back({"graph_rate", static_cast<std::int64_t>(facts.quantum.rate)});
-    made.fields.push_back({"stream_latency_frames", static_cast<std::int64_t>(facts.quantum.latencyFrames)});
+    made.fields.push_back({keys::kGraphQuantum, facts.quantum.frames});
+    made.fields.push_back({keys::kGraphRate, static_cast<std::int64_t>(facts.quantum.rate)});
+    made.fields.push_back({keys::kStreamLatencyFrames, static_cast<std::int64_t>(facts.quantum.latencyFrames)});
   }
   return made;
 }
@@ -153,15 +153,15 @@ PostMessage overloadMessage(const Occasion& occasion, const Overload& overload) 
   made.fields.push_back({keys::kIssueType, std::string("overload")});
   made.fields.push_back({keys::kSmallestBufferFrameSize, overload.frames});
   made.fields.push_back({keys::kIoCycle, overload.counter});
-  made.fields.push_back({"overload_cycles", overload.cycles});
-  made.fields.push_back({"overload_seconds", static_cast<double>(overload.duration) / kSecond});
+  made.fields.push_back({keys::kOverloadCycles, overload.cycles});
+  made.fields.push_back({keys::kOverloadSeconds, static_cast<double>(overload.duration) / kSecond});
   return made;
 }
 
 PostMessage errorMessage(const Occasion& occasion, std::string_view what, std::string_view text) {
   PostMessage made = message(occasion, Category::Error, Type::Error);
   made.fields.push_back({keys::kIssueType, std::string(what)});
-  addText(made.fields, "error_text", std::string(text.substr(0, kMostErrorText)));
+  addText(made.fields, keys::kErrorText, std::string(text.substr(0, kMostErrorText)));
   return made;
 }
 
@@ -170,7 +170,7 @@ PostMessage endMessage(const Occasion& occasion, Moment active, std::string_view
   if (occasion.run > 0) {
     made.fields.push_back({keys::kSessionDuration, static_cast<double>(active) / kSecond});
   }
-  made.fields.push_back({"end_reason", std::string(reason)});
+  made.fields.push_back({keys::kEndReason, std::string(reason)});
   return made;
 }
 

@@ -206,6 +206,71 @@
 /* The port that voice processing records from. (any) */
 #define TARN_KEY_VP_CONFIG_INPUT_PORT "vp_config_input_port"
 
+/* Streams that adapters report. */
+
+/* The number of the stream's run, from 1: no two runs have equal messages. (integer) */
+#define TARN_KEY_STREAM_RUN "stream_run"
+/* Said before, to a service that wasn't there any more: how the stream was all the time. (boolean) */
+#define TARN_KEY_RESTATED "restated"
+/* Why the stream is over. (text) */
+#define TARN_KEY_END_REASON "end_reason"
+/* The factor of the amplitude: the cube of where a mixer's slider stands. (number) */
+#define TARN_KEY_VOLUME_LINEAR "volume_linear"
+/* The stream is muted. (boolean) */
+#define TARN_KEY_MUTED "muted"
+/* The factors of the channels, with commas. (text) */
+#define TARN_KEY_CHANNEL_VOLUMES "channel_volumes"
+/* Where the slider of the sink or source stands. (number, scalar, 0 to 1) */
+#define TARN_KEY_DEVICE_VOLUME "device_volume"
+/* The sink or source is muted. (boolean) */
+#define TARN_KEY_DEVICE_MUTED "device_muted"
+/* How the devices are connected, with commas. (text) */
+#define TARN_KEY_DEVICE_BUS "device_bus"
+/* What is used of the devices, as analog-output-headphones. (text) */
+#define TARN_KEY_DEVICE_PORT "device_port"
+/* The kinds of these ports, as headphones. (text) */
+#define TARN_KEY_DEVICE_PORT_TYPE "device_port_type"
+/* What the devices look like, as headset. (text) */
+#define TARN_KEY_DEVICE_FORM_FACTOR "device_form_factor"
+/* How the devices are used, as a2dp-sink. (text) */
+#define TARN_KEY_DEVICE_PROFILE "device_profile"
+/* The codec of a Bluetooth device. (text) */
+#define TARN_KEY_BLUETOOTH_CODEC "bluetooth_codec"
+/* The first device is the one that the user chose. (boolean) */
+#define TARN_KEY_DEVICE_IS_DEFAULT "device_is_default"
+/* How many devices one stream plays to. (integer) */
+#define TARN_KEY_DEVICE_COUNT "device_count"
+/* The rate of the stream's own format. (integer, Hz) */
+#define TARN_KEY_SAMPLE_RATE "sample_rate"
+/* The cycle in which sound is passed on; ALSA's period. (integer, frames) */
+#define TARN_KEY_GRAPH_QUANTUM "graph_quantum"
+/* The rate of the cycle. (integer, Hz) */
+#define TARN_KEY_GRAPH_RATE "graph_rate"
+/* What the stream asks for; ALSA's buffer. (integer, frames) */
+#define TARN_KEY_STREAM_LATENCY_FRAMES "stream_latency_frames"
+/* Cycles that were missed in a row. (integer) */
+#define TARN_KEY_OVERLOAD_CYCLES "overload_cycles"
+/* How long the overload lasted. (number, s) */
+#define TARN_KEY_OVERLOAD_SECONDS "overload_seconds"
+/* What the system of audio says of an error. (text) */
+#define TARN_KEY_ERROR_TEXT "error_text"
+/* Stream/Output/Audio or Stream/Input/Audio. (text) */
+#define TARN_KEY_MEDIA_CLASS "media_class"
+/* What the stream is for, as its program says: Music, Game. (text) */
+#define TARN_KEY_MEDIA_ROLE "media_role"
+/* The stream's name in PipeWire; the sub-device of ALSA. (text) */
+#define TARN_KEY_STREAM_NODE "stream_node"
+/* The file that the stream's process runs, without its folder. (text) */
+#define TARN_KEY_APPLICATION_PROCESS_BINARY "application_process_binary"
+/* The number of the stream's process. (integer) */
+#define TARN_KEY_APPLICATION_PROCESS_ID "application_process_id"
+/* The name of a sandboxed application. (text) */
+#define TARN_KEY_PORTAL_APP_ID "portal_app_id"
+/* The latency that the stream asks for, as 1024/48000. (text) */
+#define TARN_KEY_REQUESTED_LATENCY "requested_latency"
+/* The title; only where the configuration asks for it. (text) */
+#define TARN_KEY_MEDIA_NAME "media_name"
+
 /* Faults. */
 
 /* What is wrong. (text) */

@@ -213,6 +213,70 @@ inline constexpr std::string_view kVpConfigOperationMode = "vp_config_operation_
 // The port that voice processing records from. (any)
 inline constexpr std::string_view kVpConfigInputPort = "vp_config_input_port";
 
+// Streams that adapters report.
+// The number of the stream's run, from 1: no two runs have equal messages. (integer)
+inline constexpr std::string_view kStreamRun = "stream_run";
+// Said before, to a service that wasn't there any more: how the stream was all the time. (boolean)
+inline constexpr std::string_view kRestated = "restated";
+// Why the stream is over. (text)
+inline constexpr std::string_view kEndReason = "end_reason";
+// The factor of the amplitude: the cube of where a mixer's slider stands. (number)
+inline constexpr std::string_view kVolumeLinear = "volume_linear";
+// The stream is muted. (boolean)
+inline constexpr std::string_view kMuted = "muted";
+// The factors of the channels, with commas. (text)
+inline constexpr std::string_view kChannelVolumes = "channel_volumes";
+// Where the slider of the sink or source stands. (number, scalar, 0 to 1)
+inline constexpr std::string_view kDeviceVolume = "device_volume";
+// The sink or source is muted. (boolean)
+inline constexpr std::string_view kDeviceMuted = "device_muted";
+// How the devices are connected, with commas. (text)
+inline constexpr std::string_view kDeviceBus = "device_bus";
+// What is used of the devices, as analog-output-headphones. (text)
+inline constexpr std::string_view kDevicePort = "device_port";
+// The kinds of these ports, as headphones. (text)
+inline constexpr std::string_view kDevicePortType = "device_port_type";
+// What the devices look like, as headset. (text)
+inline constexpr std::string_view kDeviceFormFactor = "device_form_factor";
+// How the devices are used, as a2dp-sink. (text)
+inline constexpr std::string_view kDeviceProfile = "device_profile";
+// The codec of a Bluetooth device. (text)
+inline constexpr std::string_view kBluetoothCodec = "bluetooth_codec";
+// The first device is the one that the user chose. (boolean)
+inline constexpr std::string_view kDeviceIsDefault = "device_is_default";
+// How many devices one stream plays to. (integer)
+inline constexpr std::string_view kDeviceCount = "device_count";
+// The rate of the stream's own format. (integer, Hz)
+inline constexpr std::string_view kSampleRate = "sample_rate";
+// The cycle in which sound is passed on; ALSA's period. (integer, frames)
+inline constexpr std::string_view kGraphQuantum = "graph_quantum";
+// The rate of the cycle. (integer, Hz)
+inline constexpr std::string_view kGraphRate = "graph_rate";
+// What the stream asks for; ALSA's buffer. (integer, frames)
+inline constexpr std::string_view kStreamLatencyFrames = "stream_latency_frames";
+// Cycles that were missed in a row. (integer)
+inline constexpr std::string_view kOverloadCycles = "overload_cycles";
+// How long the overload lasted. (number, s)
+inline constexpr std::string_view kOverloadSeconds = "overload_seconds";
+// What the system of audio says of an error. (text)
+inline constexpr std::string_view kErrorText = "error_text";
+// Stream/Output/Audio or Stream/Input/Audio. (text)
+inline constexpr std::string_view kMediaClass = "media_class";
+// What the stream is for, as its program says: Music, Game. (text)
+inline constexpr std::string_view kMediaRole = "media_role";
+// The stream's name in PipeWire; the sub-device of ALSA. (text)
+inline constexpr std::string_view kStreamNode = "stream_node";
+// The file that the stream's process runs, without its folder. (text)
+inline constexpr std::string_view kApplicationProcessBinary = "application_process_binary";
+// The number of the stream's process. (integer)
+inline constexpr std::string_view kApplicationProcessId = "application_process_id";
+// The name of a sandboxed application. (text)
+inline constexpr std::string_view kPortalAppId = "portal_app_id";
+// The latency that the stream asks for, as 1024/48000. (text)
+inline constexpr std::string_view kRequestedLatency = "requested_latency";
+// The title; only where the configuration asks for it. (text)
+inline constexpr std::string_view kMediaName = "media_name";
+
 // Faults.
 // What is wrong. (text)
 inline constexpr std::string_view kIssueType = "issue_type";

@@ -123,6 +123,39 @@ class Key:
     VP_CONFIG_OPERATION_MODE: Final[str] = "vp_config_operation_mode"  # any
     VP_CONFIG_INPUT_PORT: Final[str] = "vp_config_input_port"  # any
 
+    # Streams that adapters report.
+    STREAM_RUN: Final[str] = "stream_run"  # integer
+    RESTATED: Final[str] = "restated"  # boolean
+    END_REASON: Final[str] = "end_reason"  # text
+    VOLUME_LINEAR: Final[str] = "volume_linear"  # number
+    MUTED: Final[str] = "muted"  # boolean
+    CHANNEL_VOLUMES: Final[str] = "channel_volumes"  # text
+    DEVICE_VOLUME: Final[str] = "device_volume"  # number, scalar, 0 to 1
+    DEVICE_MUTED: Final[str] = "device_muted"  # boolean
+    DEVICE_BUS: Final[str] = "device_bus"  # text
+    DEVICE_PORT: Final[str] = "device_port"  # text
+    DEVICE_PORT_TYPE: Final[str] = "device_port_type"  # text
+    DEVICE_FORM_FACTOR: Final[str] = "device_form_factor"  # text
+    DEVICE_PROFILE: Final[str] = "device_profile"  # text
+    BLUETOOTH_CODEC: Final[str] = "bluetooth_codec"  # text
+    DEVICE_IS_DEFAULT: Final[str] = "device_is_default"  # boolean
+    DEVICE_COUNT: Final[str] = "device_count"  # integer
+    SAMPLE_RATE: Final[str] = "sample_rate"  # integer, Hz
+    GRAPH_QUANTUM: Final[str] = "graph_quantum"  # integer, frames
+    GRAPH_RATE: Final[str] = "graph_rate"  # integer, Hz
+    STREAM_LATENCY_FRAMES: Final[str] = "stream_latency_frames"  # integer, frames
+    OVERLOAD_CYCLES: Final[str] = "overload_cycles"  # integer
+    OVERLOAD_SECONDS: Final[str] = "overload_seconds"  # number, s
+    ERROR_TEXT: Final[str] = "error_text"  # text
+    MEDIA_CLASS: Final[str] = "media_class"  # text
+    MEDIA_ROLE: Final[str] = "media_role"  # text
+    STREAM_NODE: Final[str] = "stream_node"  # text
+    APPLICATION_PROCESS_BINARY: Final[str] = "application_process_binary"  # text
+    APPLICATION_PROCESS_ID: Final[str] = "application_process_id"  # integer
+    PORTAL_APP_ID: Final[str] = "portal_app_id"  # text
+    REQUESTED_LATENCY: Final[str] = "requested_latency"  # text
+    MEDIA_NAME: Final[str] = "media_name"  # text
+
     # Faults.
     ISSUE_TYPE: Final[str] = "issue_type"  # text
     NODE: Final[str] = "node"  # any

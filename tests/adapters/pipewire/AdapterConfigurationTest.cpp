@@ -11,13 +11,13 @@ namespace tarn::streams {
 namespace {
 
 std::string faultOf(std::string_view text) {
-  return parseConfiguration(text, "pipewire.toml").error.text();
+  return parseConfiguration(Adapter::PipeWire, text, "pipewire.toml").error.text();
 }
 
 }  // namespace
 
 TEST(PipeWireConfiguration, AnEmptyFileSaysTheDefaults) {
-  const auto read = parseConfiguration("", "pipewire.toml");
+  const auto read = parseConfiguration(Adapter::PipeWire, "", "pipewire.toml");
   ASSERT_TRUE(read.ok());
   EXPECT_FALSE(read.value.off);
   EXPECT_FALSE(read.value.mediaNames);
@@ -28,11 +28,12 @@ TEST(PipeWireConfiguration, AnEmptyFileSaysTheDefaults) {
 }
 
 TEST(PipeWireConfiguration, EveryKeyIsTaken) {
-  const auto read = parseConfiguration(
-      "[report]\noff = true\nmedia_name = true\nprofiler = false\nwithout_role = \"standalone\"\n"
-      "[applications]\nallow = [\"ox*\"]\ndeny = [\"oxrecord\", \"mpv\"]\n"
-      "[roles]\nMusic = \"nonlongformaudio\"\n\"ringtone\" = \"alerts\"\n",
-      "pipewire.toml");
+  const auto read =
+      parseConfiguration(Adapter::PipeWire,
+                         "[report]\noff = true\nmedia_name = true\nprofiler = false\nwithout_role = \"standalone\"\n"
+                         "[applications]\nallow = [\"ox*\"]\ndeny = [\"oxrecord\", \"mpv\"]\n"
+                         "[roles]\nMusic = \"nonlongformaudio\"\n\"ringtone\" = \"alerts\"\n",
+                         "pipewire.toml");
   ASSERT_TRUE(read.ok()) << read.error.text();
   EXPECT_TRUE(read.value.off);
   EXPECT_TRUE(read.value.mediaNames);
@@ -40,9 +41,9 @@ TEST(PipeWireConfiguration, EveryKeyIsTaken) {
   EXPECT_EQ(serviceTypeName(read.value.withoutRole), "standalone");
   EXPECT_EQ(read.value.allow, std::vector<std::string>{"ox*"});
   EXPECT_EQ(read.value.deny, (std::vector<std::string>{"oxrecord", "mpv"}));
-  EXPECT_EQ(serviceTypeName(read.value.serviceTypeOf("Music")), "nonlongformaudio");
-  EXPECT_EQ(serviceTypeName(read.value.serviceTypeOf("ringtone")), "alerts");
-  EXPECT_EQ(serviceTypeName(read.value.serviceTypeOf("Movie")), "longformaudio");
+  EXPECT_EQ(serviceTypeName(read.value.serviceTypeOf("Music", "")), "nonlongformaudio");
+  EXPECT_EQ(serviceTypeName(read.value.serviceTypeOf("ringtone", "")), "alerts");
+  EXPECT_EQ(serviceTypeName(read.value.serviceTypeOf("Movie", "")), "longformaudio");
 }
 
 TEST(PipeWireConfiguration, WhatIsNotKnownIsRefusedWithItsLine) {
@@ -81,9 +82,35 @@ TEST(PipeWireConfiguration, AKeyWithALineEndLeavesTheErrorOneLine) {
 }
 
 TEST(PipeWireConfiguration, AFileThatIsNotThereIsAnErrorWithItsName) {
-  const auto read = readConfiguration("/nowhere/pipewire.toml");
+  const auto read = readConfiguration(Adapter::PipeWire, "/nowhere/pipewire.toml");
   EXPECT_EQ(read.error.code(), ENOENT);
   EXPECT_EQ(read.error.text().substr(0, 23), "/nowhere/pipewire.toml:");
+}
+
+TEST(PipeWireConfiguration, ApplicationsWithoutARoleMayHaveTypes) {
+  const auto read = parseConfiguration(Adapter::PipeWire, "[types]\n\"ox*\" = \"telephony\"\nmpd = \"longformaudio\"\n",
+                                       "pipewire.toml");
+  ASSERT_TRUE(read.ok()) << read.error.text();
+  EXPECT_EQ(serviceTypeName(read.value.serviceTypeOf("", "oxcall")), "telephony");
+  EXPECT_EQ(serviceTypeName(read.value.serviceTypeOf("odd", "mpd")), "longformaudio");
+  EXPECT_EQ(serviceTypeName(read.value.serviceTypeOf("", "mpd2")), "generic");
+  EXPECT_EQ(serviceTypeName(read.value.serviceTypeOf("Game", "oxcall")), "nonlongformaudio");
+}
+
+TEST(AlsaConfiguration, SoundServersAreDeniedUnlessTheListIsAnotherOne) {
+  EXPECT_FALSE(parseConfiguration(Adapter::Alsa, "", "").value.mayReport("pipewire"));
+  EXPECT_TRUE(parseConfiguration(Adapter::Alsa, "", "").value.mayReport("mpd"));
+  EXPECT_TRUE(parseConfiguration(Adapter::Alsa, "[applications]\ndeny = []\n", "").value.mayReport("pipewire"));
+  EXPECT_TRUE(parseConfiguration(Adapter::PipeWire, "", "").value.mayReport("pipewire"));
+}
+
+TEST(AlsaConfiguration, WhatOnlyPipeWireHasIsNotKnown) {
+  EXPECT_EQ(parseConfiguration(Adapter::Alsa, "[report]\nprofiler = true\n", "a").error.text(),
+            "a:2: unknown key \"report.profiler\"");
+  EXPECT_EQ(parseConfiguration(Adapter::Alsa, "[report]\nmedia_name = true\n", "a").error.text(),
+            "a:2: unknown key \"report.media_name\"");
+  EXPECT_EQ(parseConfiguration(Adapter::Alsa, "[roles]\nMusic = \"generic\"\n", "a").error.text(),
+            "a:2: unknown key \"roles.Music\"");
 }
 
 }  // namespace tarn::streams

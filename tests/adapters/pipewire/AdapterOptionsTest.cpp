@@ -12,7 +12,7 @@ namespace {
 
 AdapterCommand parse(std::vector<const char*> words) {
   words.insert(words.begin(), "tarnreporting-pipewire");
-  return parseAdapterCommand(static_cast<int>(words.size()), words.data());
+  return parseAdapterCommand(Adapter::PipeWire, static_cast<int>(words.size()), words.data());
 }
 
 }  // namespace
@@ -58,6 +58,24 @@ TEST(PipeWireOptions, HelpAndVersionArePrinted) {
   EXPECT_EQ(parse({"--version"}).output.substr(0, 23), "tarnreporting-pipewire ");
   EXPECT_FALSE(parse({"--help"}).options);
   EXPECT_FALSE(parse({"--version"}).options);
+}
+
+TEST(AlsaOptions, TheyHaveAFolderAndAnIntervalAndNoPipeWire) {
+  const auto parseAlsa = [](std::vector<const char*> words) {
+    words.insert(words.begin(), "tarnreporting-alsa");
+    return parseAdapterCommand(Adapter::Alsa, static_cast<int>(words.size()), words.data());
+  };
+  EXPECT_EQ(parseAlsa({}).options->proc, "/proc");
+  EXPECT_EQ(parseAlsa({}).options->intervalMilliseconds, 1000);
+  EXPECT_EQ(parseAlsa({"--interval", "0.25"}).options->intervalMilliseconds, 250);
+  EXPECT_EQ(parseAlsa({"--proc", "p"}).options->proc, "p");
+  for (const char* const wrong : {"0", "0.001", "3601", "-1", "x", ""}) {
+    EXPECT_EQ(parseAlsa({"--interval", wrong}).usage.code(), kExitUsage) << wrong;
+  }
+  EXPECT_EQ(parseAlsa({"--remote", "r"}).usage.code(), kExitUsage);
+  EXPECT_EQ(parse({"--interval", "1"}).usage.code(), kExitUsage);
+  EXPECT_EQ(parseAlsa({"--version"}).output.substr(0, 19), "tarnreporting-alsa ");
+  EXPECT_NE(parseAlsa({"--help"}).output.find("alsa.toml"), std::string::npos);
 }
 
 }  // namespace tarn::streams

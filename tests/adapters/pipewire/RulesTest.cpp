@@ -29,7 +29,7 @@ TEST(PipeWireRules, AManyStarredPatternIsQuick) {
 
 TEST(PipeWireRules, RolesHaveTheirTypes) {
   const Rules rules;
-  const auto nameOf = [&rules](std::string_view role) { return serviceTypeName(rules.serviceTypeOf(role)); };
+  const auto nameOf = [&rules](std::string_view role) { return serviceTypeName(rules.serviceTypeOf(role, "")); };
   EXPECT_EQ(nameOf("Music"), "longformaudio");
   EXPECT_EQ(nameOf("Movie"), "longformaudio");
   EXPECT_EQ(nameOf("Game"), "nonlongformaudio");

@@ -25,6 +25,27 @@ TEST(AlsaText, OpenSubstreamTellsStateTimesPointerAndOverruns) {
   EXPECT_EQ(status->nowNanoseconds, 4250000000001);
   EXPECT_EQ(status->hardwarePointer, 363636U);
   EXPECT_EQ(status->overruns, 2U);
+  EXPECT_EQ(status->owner, 1841U);
+}
+
+TEST(AlsaText, ParametersTellFormatRateAndSizes) {
+  const auto parameters = parseAlsaParameters(
+      "access: RW_INTERLEAVED\nformat: S16_LE\nsubformat: STD\nchannels: 2\nrate: 44100 (44100/1)\n"
+      "period_size: 1024\nbuffer_size: 4096\n");
+  EXPECT_EQ(parameters, (AlsaParameters{"S16_LE", 2, 44100, 1024, 4096}));
+}
+
+TEST(AlsaText, ParametersThatAreNotWholeAreNone) {
+  const std::string whole = "format: S16_LE\nchannels: 2\nrate: 44100\nperiod_size: 1024\nbuffer_size: 4096\n";
+  ASSERT_TRUE(parseAlsaParameters(whole));
+  for (const char* const text : {"", "closed\n", "no setup\n"}) {
+    EXPECT_FALSE(parseAlsaParameters(text)) << text;
+  }
+  for (const char* const key : {"format", "channels", "rate", "period_size", "buffer_size"}) {
+    std::string without = whole;
+    without.insert(without.find(key), "x");
+    EXPECT_FALSE(parseAlsaParameters(without)) << key;
+  }
 }
 
 TEST(AlsaText, EveryStateIsKnownAndOthersAreOther) {

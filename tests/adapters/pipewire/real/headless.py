@@ -75,6 +75,7 @@ class Machine:
         for name in ("PIPEWIRE_REMOTE", "TARNREPORTING_SOCKET"):
             self.environment.pop(name, None)
         self.running = []
+        self.before = 0
         self.log = open(os.path.join(self.folder, "adapter.log"), "ab")
 
     # Programs
@@ -130,6 +131,7 @@ class Machine:
         self.start_pipewire()
         self.start_adapter(*words)
         need(eventually(lambda: "looking at PipeWire" in self.adapter_log()), self.adapter_log())
+        self.mark()
 
     def ctl(self, *words):
         return self.tool(self.control, "--socket", self.socket, "--state-dir", self.state, *words)
@@ -138,14 +140,22 @@ class Machine:
         with open(os.path.join(self.folder, "adapter.log"), encoding="utf-8") as file:
             return file.read()
 
-    def tolerance(self):
-        """By how much times may be off until now: on a busy machine events are sent and read late, and by how long the
-        two that do it waited for a processor while they had something to do, the kernel tells."""
-        waited = 0
+    def waited(self):
+        """How long PipeWire and the adapter waited for a processor while they had something to do, in seconds."""
+        nanoseconds = 0
         for process in (self.pipewire, self.adapter):
             with open(f"/proc/{process.pid}/schedstat", encoding="utf-8") as file:
-                waited += int(file.read().split()[1])
-        return TOLERANCE + waited / 1e9
+                nanoseconds += int(file.read().split()[1])
+        return nanoseconds / 1e9
+
+    def mark(self):
+        """From here on times are looked at."""
+        self.before = self.waited()
+
+    def tolerance(self):
+        """By how much times may be off that were taken since the mark: on a busy machine events are sent and read
+        late."""
+        return TOLERANCE + self.waited() - self.before
 
     # PipeWire
 
