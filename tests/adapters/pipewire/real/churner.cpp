@@ -1,9 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
-// A program whose streams come and go as fast as they can, each once sound has flowed in it.
+// A program with many streams that come and go.
 //
-//   churner SECONDS
+//   churner SECONDS               as fast as they can, each once sound has flowed in it: as fast as they are linked
+//   churner SECONDS bare RATE     so many a second, which nobody links: each is seen and gone
+//   churner SECONDS pause RATE    streams that stay, of which one starts and one stops so many times a second
 //
-// It prints how many there were.
+// It prints how many there were; of those that stay, how many times one started.
 #include <pipewire/pipewire.h>
 #include <spa/param/audio/format-utils.h>
 
@@ -11,10 +13,13 @@
 #include <cstdio>
 #include <cstdlib>
 #include <string>
+#include <string_view>
 
 namespace {
 
 constexpr std::size_t kAtOnce = 8;
+
+enum class Way { Linked, Bare, Pause };
 
 struct Churner;
 
@@ -23,6 +28,7 @@ struct Slot {
   pw_stream* stream = nullptr;
   spa_hook hook{};
   bool isOver = false;
+  bool isPaused = false;
 };
 
 struct Churner {
@@ -30,6 +36,8 @@ struct Churner {
   pw_core* core = nullptr;
   spa_source* turn = nullptr;
   std::array<Slot, kAtOnce> slots;
+  Way way = Way::Linked;
+  std::size_t next = 0;
   unsigned long started = 0;
   unsigned long over = 0;
 };
@@ -38,6 +46,7 @@ void stateChanged(void* data, pw_stream_state, pw_stream_state state, const char
   auto& slot = *static_cast<Slot*>(data);
   if (state != PW_STREAM_STATE_STREAMING || slot.isOver) return;
   slot.isOver = true;
+  if (slot.churner->way != Way::Linked) return;
   pw_loop_signal_event(pw_main_loop_get_loop(slot.churner->loop), slot.churner->turn);
 }
 
@@ -58,8 +67,39 @@ void begin(Churner& churner, Slot& slot) {
                               pw_properties_new(PW_KEY_MEDIA_TYPE, "Audio", PW_KEY_MEDIA_CATEGORY, "Playback",
                                                 PW_KEY_MEDIA_ROLE, "Game", PW_KEY_APP_ID, "org.test.churn", nullptr));
   pw_stream_add_listener(slot.stream, &slot.hook, &kEvents, &slot);
+  const auto linked = churner.way == Way::Bare ? PW_STREAM_FLAG_NONE : PW_STREAM_FLAG_AUTOCONNECT;
   pw_stream_connect(slot.stream, PW_DIRECTION_OUTPUT, PW_ID_ANY,
-                    static_cast<pw_stream_flags>(PW_STREAM_FLAG_AUTOCONNECT | PW_STREAM_FLAG_MAP_BUFFERS), params, 1);
+                    static_cast<pw_stream_flags>(linked | PW_STREAM_FLAG_MAP_BUFFERS), params, 1);
+}
+
+// One of those that come and go by the clock.
+void beatOnce(Churner& churner) {
+  Slot& slot = churner.slots[churner.next++ % kAtOnce];
+  if (churner.way == Way::Bare) {
+    pw_stream_destroy(slot.stream);
+    ++churner.over;
+    begin(churner, slot);
+    return;
+  }
+  if (!slot.isOver) return;  // it isn't linked yet
+  slot.isPaused = !slot.isPaused;
+  pw_stream_set_active(slot.stream, !slot.isPaused);
+  churner.over += slot.isPaused ? 0 : 1;
+}
+
+// As many as it is late.
+void beat(void* data, std::uint64_t beats) {
+  for (; beats > 0; --beats) {
+    beatOnce(*static_cast<Churner*>(data));
+  }
+}
+
+void startBeat(Churner& churner, double rate) {
+  pw_loop* const loop = pw_main_loop_get_loop(churner.loop);
+  // Half of them are stops.
+  const long pause = static_cast<long>(1e9 / (churner.way == Way::Pause ? 2 * rate : rate));
+  timespec each{0, pause};
+  pw_loop_update_timer(loop, pw_loop_add_timer(loop, &beat, &churner), &each, &each, false);
 }
 
 void turn(void* data, std::uint64_t) {
@@ -79,7 +119,7 @@ void end(void* data, std::uint64_t) {
 }  // namespace
 
 int main(int count, char** words) {
-  if (count != 2) return 64;
+  if (count != 2 && count != 4) return 64;
   pw_init(nullptr, nullptr);
   Churner churner;
   churner.loop = pw_main_loop_new(nullptr);
@@ -87,10 +127,16 @@ int main(int count, char** words) {
   pw_context* const context = pw_context_new(loop, nullptr, 0);
   churner.core = pw_context_connect(context, nullptr, 0);
   if (churner.core == nullptr) return 1;
+  if (count == 4) {
+    churner.way = words[2] == std::string_view("bare") ? Way::Bare : Way::Pause;
+  }
   churner.turn = pw_loop_add_event(loop, &turn, &churner);
   for (Slot& slot : churner.slots) {
     slot.churner = &churner;
     begin(churner, slot);
+  }
+  if (churner.way != Way::Linked) {
+    startBeat(churner, std::stod(words[3]));
   }
   spa_source* const timer = pw_loop_add_timer(loop, &end, &churner);
   timespec due{std::stol(words[1]), 0};

@@ -15,6 +15,7 @@ import time
 from headless import Machine, eventually
 
 IDLE_STREAMS = 5
+RATE = 200
 
 
 def switches(pid):
@@ -47,11 +48,11 @@ def measure(machine, name, seconds, work=time.sleep):
           f"{memory(pid) / 1024:.1f} MiB at the most{rate}", flush=True)
 
 
-def churn(machine, streamer):
-    """Streams that come and go as fast as they can: each a node that plays for a moment."""
+def churn(machine, streamer, *words):
+    """Streams that come and go: as fast as they can, or so many a second."""
     def work(seconds):
         churner = streamer.replace("streamer", "churner")
-        answer = subprocess.run([churner, str(seconds)], env=machine.environment, text=True, check=True,
+        answer = subprocess.run([churner, str(seconds), *words], env=machine.environment, text=True, check=True,
                                 stdout=subprocess.PIPE, stdin=subprocess.DEVNULL)
         return int(answer.stdout.split()[-1])
     return work
@@ -73,6 +74,8 @@ def main(programs, streamer, seconds=10):
             time.sleep(3)
             measure(machine, f"{IDLE_STREAMS} streams that play, {kind}", seconds)
             measure(machine, f"streams that come and go, {kind}", seconds, churn(machine, streamer))
+            measure(machine, f"that nobody links, {kind}", seconds, churn(machine, streamer, "bare", str(RATE)))
+            measure(machine, f"that start and stop, {kind}", seconds, churn(machine, streamer, "pause", str(RATE)))
         finally:
             machine.close()
 
