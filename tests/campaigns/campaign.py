@@ -39,6 +39,7 @@ CAMPAIGNS = {
     "ringkills": ("ringkills", "SIGKILL to programs that post to rings: what a ring calls posted is there, once"),
     "ringrestarts": ("ringrestarts", "the service ends and starts while programs post to rings: no call fails"),
     "streams": ("streams", "200 streams a minute of a real PipeWire: a session each, as long as it ran, none open"),
+    "reloads": ("reloads", "the configuration is read anew under load, a tenth broken: no client notices"),
     "restarts": ("restarts", "SIGTERM at random moments under load: all that was answered is there, once"),
 }
 

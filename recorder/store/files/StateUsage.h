@@ -29,6 +29,8 @@ class StateUsage {
   // Looks at all of it and removes what is beyond the shares (a fourth of the cap for files set aside, an eighth for
   // each folder); the names of what was removed. A file that can't be removed is passed over, and counts.
   std::vector<std::string> tidy();
+  // Another cap from the next tidy() on.
+  void setCap(std::int64_t cap) noexcept { cap_ = cap; }
   // What the database may take beside a log of this size, as of the last tidy(); a fourth of the cap at the least.
   std::int64_t databaseBytes(std::int64_t logBytes) const noexcept;
 
@@ -36,7 +38,7 @@ class StateUsage {
   const std::filesystem::path file_;
   const std::vector<std::filesystem::path> folders_;
   // Bytes, of everything together.
-  const std::int64_t cap_;
+  std::int64_t cap_;
   const Others others_;
   std::int64_t beside_ = 0;  // of all but the database and its log
 };
