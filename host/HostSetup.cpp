@@ -37,7 +37,8 @@ Result<ListenSocket> openSocket(const ServiceOptions& options) {
 Status HostSetup::prepare(const ServiceOptions& options) {
   // Whatever a caller's mask lets through: what the service makes is for its user and group alone.
   ::umask(::umask(0) | S_IWGRP | S_IRWXO);
-  if (const Status read = readSettings(options); read.failed()) return Error{kExitConfiguration, read->text};
+  options_ = options;
+  if (const Status read = readSettings(); read.failed()) return Error{kExitConfiguration, read->text};
   if (const Status prepared = prepareStateDirectory(options.stateDirectory); prepared.failed()) {
     return Error{kExitFailure, prepared->text};
   }
@@ -48,7 +49,7 @@ Status HostSetup::prepare(const ServiceOptions& options) {
   if (const Status held = holdStateDirectory(options.stateDirectory, stateLock_); held.failed()) {
     return Error{kExitFailure, held->text};
   }
-  Result<std::unique_ptr<QueuedLog>> opening = openLog(options.logTarget, options.logLevel, clock);
+  Result<std::unique_ptr<QueuedLog>> opening = openLog(options.logTarget, configuration.logLevel, clock);
   if (opening.failed()) return Error{kExitFailure, opening.error->text};
   queuedLog_ = std::move(opening.value);
   log = std::make_unique<LogFloodGuard>(*queuedLog_, clock);
@@ -60,17 +61,29 @@ void HostSetup::settleLog() {
   static_cast<void>(queuedLog_->settle(kLastWhileOfTheLog));
 }
 
-Status HostSetup::readSettings(const ServiceOptions& options) {
+void HostSetup::setLogLevel(platform::LogLevel level) noexcept {
+  queuedLog_->setLevel(level);
+  log->setLevel(level);
+}
+
+Result<HostConfiguration> HostSetup::readConfiguration() const {
   // One that is named must be there; the installed one may be absent.
-  const auto& named = options.configurationFile;
-  if (const std::string& file = named ? *named : options.defaultConfigurationFile; !file.empty()) {
-    Result<HostConfiguration> read = readConfigurationWithDropIns(file, !named);
-    if (read.failed()) return std::move(read.error);
-    configuration = std::move(read.value);
+  const auto& named = options_.configurationFile;
+  Result<HostConfiguration> read;
+  if (const std::string& file = named ? *named : options_.defaultConfigurationFile; !file.empty()) {
+    read = readConfigurationWithDropIns(file, !named);
   }
-  if (options.devicePropertiesFile) return deviceProperties.load(*options.devicePropertiesFile);
-  if (options.defaultDevicePropertiesFile.empty()) return {};
-  Status loaded = deviceProperties.load(options.defaultDevicePropertiesFile);
+  read.value.logLevel = options_.logLevel.value_or(read.value.logLevel);
+  return read;
+}
+
+Status HostSetup::readSettings() {
+  Result<HostConfiguration> read = readConfiguration();
+  if (read.failed()) return std::move(read.error);
+  configuration = std::move(read.value);
+  if (options_.devicePropertiesFile) return deviceProperties.load(*options_.devicePropertiesFile);
+  if (options_.defaultDevicePropertiesFile.empty()) return {};
+  Status loaded = deviceProperties.load(options_.defaultDevicePropertiesFile);
   const bool isAbsent = loaded.failed() && (loaded->code == ENOENT || loaded->code == ENOTDIR);
   return isAbsent ? Status() : std::move(loaded);
 }

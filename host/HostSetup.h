@@ -37,6 +37,12 @@ class HostSetup {
   // end then. Any thread.
   void settleLog();
 
+  // Reads the configuration as it is now, checked whole; what an option says stands in it in the place of what the file
+  // says. Once prepared. Threads: any.
+  Result<HostConfiguration> readConfiguration() const;
+  // Logs from this level on. Once prepared. Threads: any.
+  void setLogLevel(platform::LogLevel level) noexcept;
+
   // What was read: the file's settings, or the defaults without one.
   HostConfiguration configuration;
   JsonDeviceProperties deviceProperties;
@@ -50,7 +56,9 @@ class HostSetup {
 
  private:
   // With its drop-ins. A file that is named must be there; the installed ones may be absent.
-  Status readSettings(const ServiceOptions& options);
+  Status readSettings();
+
+  ServiceOptions options_;
 
   // Held for the life of the process.
   FileLock stateLock_;

@@ -104,6 +104,7 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
       log_(ground.log),
       serviceManager_(ground.serviceManager),
       settleLog_(std::move(ground.settleLog)),
+      setLogLevel_(std::move(ground.setLogLevel)),
       loop_(clock_),
       connections_(loop_, log_, withinTheSystem(configuration.limits)),
       overflow_(stateDirectory, configuration.limits.logs, overflowShare(configuration.recorder)),
@@ -134,6 +135,9 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
       traceAnalysis_(configuration.paths.traceAnalysis.value_or(LinuxTraceAnalysis::defaultPath()), log_),
       deviceProperties_(std::move(deviceProperties)),
       watchdog_(clock_, loop_.progress(), serviceManager_),
+      statusLine_(loop_, serviceManager_, [this] { return statusNumbers(); }),
+      reload_(loop_, log_, serviceManager_, configuration, std::move(ground.readConfiguration),
+              [this](const HostConfiguration& inForce) { adopt(inForce); }),
       facilities_(facilitiesOf()) {
   // What comes in is held up while what it becomes piles up.
   recorder_.setRoomHandler([this] { connections_.resumeRequests(); });
@@ -149,6 +153,11 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
   });
   loop_.addTurnHook([this] { lookForTheEnd(); });
   loop_.addTurnHook([this] { tellLosses(); });
+  loop_.addTurnHook([this] {
+    const Ledger& ledger = connections_.ledger;
+    statusLine_.look(ledger.framesReceived + ledger.messagesReceived + ledger.connectionsTotal +
+                     ledger.connectionsOpen);
+  });
   if (recorderEnabled_) {
     // What was sent may still be on its way through the workers' own queues.
     connections_.setSettleSource([this](platform::Work done) {
@@ -223,8 +232,33 @@ Status LinuxPlatform::listen(ListenSocket socket, const std::shared_ptr<platform
   listener_->setDelegate(delegate);
   listener_->resume();
   serviceManager_.notifyReady();
+  statusLine_.start();
   watchdog_.start();
   return {};
+}
+
+void LinuxPlatform::reload() {
+  if (!ending_) {
+    reload_.request();
+  }
+}
+
+void LinuxPlatform::adopt(const HostConfiguration& configuration) {
+  if (setLogLevel_) {
+    setLogLevel_(configuration.logLevel);
+  }
+  tally_.setInUse(configuration.tally.inUse);
+  rtc_.setBehaviour(configuration.rtc);
+  snare_.setRefusal(configuration.snare.refuse);
+  recorder_.setRetention(configuration.recorder);
+  overflow_.setBounds(configuration.limits.logs, overflowShare(configuration.recorder));
+  connections_.adopt(configuration.limits);
+}
+
+StatusNumbers LinuxPlatform::statusNumbers() {
+  const Ledger& ledger = connections_.ledger;
+  return {serviceCounts_().sessions, ledger.connectionsOpen, loop_.queue()->waiting() + workQueues_.unfinished(),
+          ledger.messagesReceived};
 }
 
 void LinuxPlatform::endClients(platform::UniqueFunction<void()> clientsAreGone) {
@@ -307,6 +341,7 @@ plist::Dictionary LinuxPlatform::status() {
       connections_.ledger.status(serviceCounts_(), loop_.queue()->waiting() + workQueues_.unfinished(),
                                  {counters.handedOver, counters.committed, counters.waiting, counters.expired,
                                   counters.failed, counters.lostBefore});
+  reload_.describe(status);
   status.set("quotas", connections_.quotaUse());
   status.set("out_of_memory", lossStatus());
   status.set("recorder_expired_by_user", expiredStatus(recorder_.expiredByOwner()));

@@ -18,7 +18,9 @@
 #include <string>
 #include <vector>
 
+#include "host/ConfigurationReload.h"
 #include "host/NoTallyService.h"
+#include "host/StatusLine.h"
 #include "host/drivers/AlsaFlume.h"
 #include "host/drivers/FlumeFiles.h"
 #include "host/drivers/LinuxFlumeService.h"
@@ -76,6 +78,8 @@ class LinuxPlatform final : private platform::ProcessControl {
     platform::Log& log;
     ServiceManager& serviceManager;
     platform::UniqueFunction<void()> settleLog = {};  // the last thing before the process ends
+    ConfigurationReload::Read readConfiguration = {};
+    platform::UniqueFunction<void(platform::LogLevel)> setLogLevel = {};
   };
 
   // Makes the parts and puts them together: no thread, no file and no client yet. The limit of open descriptors is
@@ -106,6 +110,9 @@ class LinuxPlatform final : private platform::ProcessControl {
   // process ends with status 0, whatever the queue is at. A second call does nothing. On the loop's thread, from work
   // or an event of it.
   void endClients(platform::UniqueFunction<void()> clientsAreGone);
+  // Reads the configuration anew and takes over what may change, soon; see ConfigurationReload. Nothing while the
+  // clients end. On the loop's thread.
+  void reload();
   // Serves until the loop is stopped, then serves the requests that were taken and makes safe what the recorder holds.
   // Blocks for the life of the service.
   void serve();
@@ -117,6 +124,9 @@ class LinuxPlatform final : private platform::ProcessControl {
   platform::Facilities facilitiesOf();
   // The ledger with the recorder's and the service's counts, what waits on all queues, and the quotas.
   plist::Dictionary status();
+  // What a running service takes over of a configuration.
+  void adopt(const HostConfiguration& configuration);
+  StatusNumbers statusNumbers();
   // Once a turn, while the clients end: whether the last is gone and nothing waits any more.
   void lookForTheEnd();
   // Once a turn: what was given up for want of memory, in one line a second at the most.
@@ -136,6 +146,7 @@ class LinuxPlatform final : private platform::ProcessControl {
   platform::Log& log_;
   ServiceManager& serviceManager_;
   platform::UniqueFunction<void()> settleLog_;
+  platform::UniqueFunction<void(platform::LogLevel)> setLogLevel_;
   // What stands between clients and the service.
   MainLoop loop_;
   // Outlives the listener, and with it every connection.
@@ -180,6 +191,8 @@ class LinuxPlatform final : private platform::ProcessControl {
   JsonDeviceProperties deviceProperties_;
   // The service's life.
   Watchdog watchdog_;
+  StatusLine statusLine_;
+  ConfigurationReload reload_;
   // From listen() on.
   ServiceCount serviceCounts_;
   std::shared_ptr<SocketListener> listener_;

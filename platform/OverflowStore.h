@@ -37,8 +37,8 @@ class OverflowStore {
 
   virtual ~OverflowStore() = default;
 
-  // The same all the time; asked once.
-  virtual Bounds bounds() const = 0;
+  // The same object all the time, whose numbers may change while the server queue isn't at work: it is read there.
+  virtual const Bounds& bounds() const = 0;
   // Keeps these bytes, of which there is at least one, until they are removed. After an error nothing is kept; a disk
   // without room is one, and the caller goes on in memory.
   virtual Result<Place> write(std::string_view bytes) = 0;

@@ -68,6 +68,15 @@ EventWriter::EventWriter(const RecorderOptions& options, platform::Log& log, con
   file_.setLogLimit(logLimit(options));
 }
 
+void EventWriter::setRetention(const RecorderOptions& options) {
+  options_.maxMegabytes = options.maxMegabytes;
+  options_.maxAgeDays = options.maxAgeDays;
+  options_.summaryMaxAgeDays = options.summaryMaxAgeDays;
+  usage_.setCap(capOf(options_));
+  file_.setLimits(limitsOf(options_));
+  file_.setLogLimit(logLimit(options_));
+}
+
 bool EventWriter::open() {
   Status error;
   for (int tries = 0; tries < kTriesAtOnce; ++tries) {

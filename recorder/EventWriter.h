@@ -40,10 +40,13 @@ namespace tarn::recorder {
 
 class EventWriter {
  public:
-  // Options, log and clock outlive this. Nothing is opened or made.
+  // Log and clock outlive this. Nothing is opened or made.
   EventWriter(const RecorderOptions& options, platform::Log& log, const platform::Clock& clock);
   EventWriter(const EventWriter&) = delete;
   EventWriter& operator=(const EventWriter&) = delete;
+
+  // Keeps as much and for as long as these options say, from the next maintain() on; the rest of them isn't looked at.
+  void setRetention(const RecorderOptions& options);
 
   // Opens the file if it isn't open, and carries on what a failure left half done: a loss to be noted, rows to be
   // carried out of a file that was set aside. False: a fault; come again later. The first time it reads the whole file.
@@ -114,7 +117,7 @@ class EventWriter {
   // The payload as JSON; two events in a row that share one form it once.
   const std::string& payloadText(const plist::Dictionary& payload);
 
-  const RecorderOptions& options_;
+  RecorderOptions options_;
   const platform::Clock& clock_;
   RecorderLog log_;
   // What it writes to, and what else lies beside that under the same cap.

@@ -141,6 +141,14 @@ void Recorder::noteRoom() noexcept {
   room_.store(waiting < crowd ? crowd - waiting : 0, std::memory_order_relaxed);
 }
 
+void Recorder::setRetention(const RecorderOptions& options) {
+  {
+    const MutexLock lock(mutex_);
+    retention_ = options;
+  }
+  work_.notifyAll();
+}
+
 RecorderCounters Recorder::counters() const {
   const MutexLock lock(mutex_);
   return {handedOver_, committed_, handedOver_ - committed_ - failed_, expired_, failed_, lostBefore_};

@@ -100,6 +100,8 @@ class Recorder {
   bool isCrowded() const noexcept { return crowded_.load(std::memory_order_relaxed); }
   // How many more events may come until it is. A load. Threads: any.
   std::size_t roomUntilCrowded() const noexcept { return room_.load(std::memory_order_relaxed); }
+  // Keeps as much and for as long as these options say from soon on; nothing else of them counts. Threads: any.
+  void setRetention(const RecorderOptions& options);
   // All counters of one moment. Threads: any.
   RecorderCounters counters() const;
   // Events removed by retention, by the uid of their session; see Retention for those of nobody. Threads: any.
@@ -144,6 +146,8 @@ class Recorder {
   void waitForRetry() TARN_REQUIRES(mutex_);
   // The next commit of the current group; false for a fault.
   bool writeCurrent() TARN_REQUIRES(mutex_);
+  // Hands the writer what setRetention() left for it.
+  void takeRetention() TARN_REQUIRES(mutex_);
   // Retention's next step, and when the one after it is due.
   bool maintain() TARN_REQUIRES(mutex_);
   // The next piece of the check, and when the one after it is due.
@@ -228,6 +232,7 @@ class Recorder {
   bool busy_ TARN_GUARDED_BY(mutex_) = false;          // the last group was large
   std::size_t most_ TARN_GUARDED_BY(mutex_);           // events that may wait, at the pace of the last commits
   std::uint64_t awaited_ TARN_GUARDED_BY(mutex_) = 0;  // accepted before the last flush() or settle()
+  std::optional<RecorderOptions> retention_ TARN_GUARDED_BY(mutex_);  // another one, until the writer has it
   Settlement settling_ TARN_GUARDED_BY(mutex_);
   bool asleep_ TARN_GUARDED_BY(mutex_) = false;  // the writer waits for the first event of a group
   bool opened_ TARN_GUARDED_BY(mutex_) = false;

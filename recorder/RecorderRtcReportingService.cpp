@@ -4,6 +4,7 @@
 #include <utility>
 
 #include "plist/Dictionary.h"
+#include "plist/ThreadSafety.h"
 #include "recorder/LateReplies.h"
 #include "recorder/Recorder.h"
 
@@ -29,13 +30,18 @@ class RecorderRtcReportingService::Completions {
   Completions(platform::WorkQueues& workQueues, const Behaviour& behaviour)
       : isLate_(behaviour.startDelay != std::chrono::milliseconds::zero()),
         late_(workQueues, {"sys.oxbow.tarnkit.recorder.rtc", kMostLate, behaviour.startDelay}) {
-    if (!behaviour.noBackends) {
-      backends_ = behaviour.backends;
-    }
+    setBackends(behaviour);
+  }
+
+  void setBackends(const Behaviour& behaviour) {
+    auto backends = std::make_shared<const Backends>(behaviour.noBackends ? Backends() : Backends(behaviour.backends));
+    const MutexLock lock(mutex_);
+    backends_.swap(backends);
   }
 
   void add(platform::RtcReportingSession::StartCompletion completion) {
-    platform::Work complete([this, completion = std::move(completion)]() mutable { completion(backends_); });
+    platform::Work complete(
+        [backends = backends(), completion = std::move(completion)]() mutable { completion(*backends); });
     if (!isLate_ || !late_.add(std::move(complete))) {
       complete();
     }
@@ -43,7 +49,15 @@ class RecorderRtcReportingService::Completions {
   void close() { late_.close(); }
 
  private:
-  std::optional<std::vector<std::string>> backends_;
+  using Backends = std::optional<std::vector<std::string>>;
+
+  std::shared_ptr<const Backends> backends() {
+    const MutexLock lock(mutex_);
+    return backends_;
+  }
+
+  Mutex mutex_;
+  std::shared_ptr<const Backends> backends_ TARN_GUARDED_BY(mutex_);
   const bool isLate_;
   LateReplies late_;
 };
@@ -84,6 +98,11 @@ RecorderRtcReportingService::RecorderRtcReportingService(Recorder& recorder, con
 
 RecorderRtcReportingService::~RecorderRtcReportingService() {
   completions_->close();
+}
+
+void RecorderRtcReportingService::setBehaviour(const Behaviour& behaviour) {
+  available_ = behaviour.available;
+  completions_->setBackends(behaviour);
 }
 
 std::optional<std::string> RecorderRtcReportingService::newHierarchyToken(const std::optional<std::string>&) {

@@ -45,6 +45,10 @@ class RecorderRtcReportingService final : public platform::RtcReportingService {
   // Completions that have not come by then never come; one that runs is waited for.
   ~RecorderRtcReportingService() override;
 
+  // Answers so from now on, but for the delay, which stays; starts whose completion is late are answered as they were
+  // made. Threads: any.
+  void setBehaviour(const Behaviour& behaviour);
+
   // "rtc-token-N", N counting from 1 in each run; nothing when the configuration hands out none. The parent isn't
   // looked at.
   std::optional<std::string> newHierarchyToken(const std::optional<std::string>& parentToken) override;
@@ -62,7 +66,7 @@ class RecorderRtcReportingService final : public platform::RtcReportingService {
   Recorder& recorder_;
   const platform::Clock& clock_;
   // Of the configuration.
-  const bool available_;
+  std::atomic<bool> available_;
   // Sessions hold it weakly: after the service's end a start is answered by nobody.
   const std::shared_ptr<Completions> completions_;
   // Numbers given so far.

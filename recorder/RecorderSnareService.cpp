@@ -2,6 +2,7 @@
 #include "recorder/RecorderSnareService.h"
 
 #include <array>
+#include <atomic>
 #include <cstdint>
 #include <string>
 #include <utility>
@@ -44,7 +45,7 @@ class RecorderSnareService::Intake {
       : recorder_(recorder),
         clock_(clock),
         randomSource_(randomSource),
-        refuse_(refuse),
+        refuse_(codeOf(refuse)),
         replies_(workQueues, {"sys.oxbow.tarnkit.recorder.snare", kMostWaitingReplies}) {}
 
   // Takes a request; whether it did. It is recorded before it is answered.
@@ -60,17 +61,24 @@ class RecorderSnareService::Intake {
     replies_.ifOpen([&] { record("cancelSession", {}, {{"session", sessionIdentifier}}); });
   }
 
+  void setRefusal(std::optional<platform::SnareReason> refuse) noexcept { refuse_ = codeOf(refuse); }
   // Takes and answers nothing more.
   void close() { replies_.close(); }
 
  private:
+  static constexpr std::int32_t kNoRefusal = -1;
+
+  static std::int32_t codeOf(std::optional<platform::SnareReason> refuse) noexcept {
+    return refuse ? static_cast<std::int32_t>(*refuse) : kNoRefusal;
+  }
+
   void record(std::string_view name, plist::Dictionary payload, plist::Dictionary detail) {
     recorder_.record(kBackend, name, std::move(payload), std::move(detail), clock_.epochSeconds());
   }
 
   plist::Dictionary reply() {
-    if (refuse_) {
-      return {{SnareReplyKeys::kSuccess, false}, {SnareReplyKeys::kReasonCode, static_cast<std::int32_t>(*refuse_)}};
+    if (const std::int32_t refusal = refuse_; refusal != kNoRefusal) {
+      return {{SnareReplyKeys::kSuccess, false}, {SnareReplyKeys::kReasonCode, refusal}};
     }
     return {{SnareReplyKeys::kSuccess, true}, {SnareReplyKeys::kSessionIdentifier, freshIdentifier(randomSource_)}};
   }
@@ -78,7 +86,7 @@ class RecorderSnareService::Intake {
   Recorder& recorder_;
   const platform::Clock& clock_;
   platform::RandomSource& randomSource_;
-  const std::optional<platform::SnareReason> refuse_;
+  std::atomic<std::int32_t> refuse_;  // a reason, or that there is none
   LateReplies replies_;
 };
 
@@ -122,6 +130,10 @@ RecorderSnareService::RecorderSnareService(Recorder& recorder, const platform::C
 
 RecorderSnareService::~RecorderSnareService() {
   intake_->close();
+}
+
+void RecorderSnareService::setRefusal(std::optional<platform::SnareReason> refuse) noexcept {
+  intake_->setRefusal(refuse);
 }
 
 std::shared_ptr<platform::SnareReporter> RecorderSnareService::createReporter() {

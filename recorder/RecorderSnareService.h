@@ -38,6 +38,9 @@ class RecorderSnareService : public platform::SnareService {
   RecorderSnareService(const RecorderSnareService&) = delete;
   RecorderSnareService& operator=(const RecorderSnareService&) = delete;
 
+  // Refuses with this reason from now on, or no more: replies that wait are given so too. Threads: any.
+  void setRefusal(std::optional<platform::SnareReason> refuse) noexcept;
+
   // A new one, never null. All of them share the service's line of replies.
   std::shared_ptr<platform::SnareReporter> createReporter() override;
 

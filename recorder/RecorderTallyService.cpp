@@ -11,10 +11,15 @@ namespace tarn::recorder {
 
 RecorderTallyService::RecorderTallyService(Recorder& recorder, const platform::Clock& clock,
                                            std::vector<std::string> inUse)
-    : recorder_(recorder),
-      clock_(clock),
-      inUse_(std::move(inUse)),
-      all_(std::find(inUse_.begin(), inUse_.end(), "*") != inUse_.end()) {}
+    : recorder_(recorder), clock_(clock) {
+  setInUse(std::move(inUse));
+}
+
+void RecorderTallyService::setInUse(std::vector<std::string> inUse) {
+  inUse_ = std::move(inUse);
+  all_ = std::find(inUse_.begin(), inUse_.end(), "*") != inUse_.end();
+  remembered_.clear();
+}
 
 bool RecorderTallyService::matchesAny(std::string_view name) const noexcept {
   return std::any_of(inUse_.begin(), inUse_.end(),

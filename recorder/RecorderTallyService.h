@@ -29,6 +29,8 @@ class RecorderTallyService : public platform::TallyService {
   // `inUse`: patterns of the wanted names (see globMatches). The recorder and the clock outlive this.
   RecorderTallyService(Recorder& recorder, const platform::Clock& clock, std::vector<std::string> inUse);
 
+  // Other patterns from now on.
+  void setInUse(std::vector<std::string> inUse);
   // Whether a pattern matches the whole name. The patterns are asked once for each name that is remembered; with "*"
   // among them, or with none, nothing is looked up.
   bool eventIsInUse(std::string_view name) override;
@@ -48,9 +50,9 @@ class RecorderTallyService : public platform::TallyService {
 
   Recorder& recorder_;
   const platform::Clock& clock_;
-  // As the configuration has them; they don't change.
-  const std::vector<std::string> inUse_;
-  const bool all_;  // one of the patterns is "*"
+  // As the configuration has them.
+  std::vector<std::string> inUse_;
+  bool all_ = false;  // one of the patterns is "*"
   // Name, and whether it is in use. Of the server queue alone, so without a lock.
   std::unordered_map<std::string, bool, NameHash, std::equal_to<>> remembered_;
 };

@@ -82,6 +82,7 @@ void Recorder::run() {
     for (;;) {
       healthy ? waitForWork() : waitForRetry();
       if (stopping_ && (!hasWaiting() || triesLeft == 0)) break;
+      takeRetention();
       if (position_ == current_.size() && !incoming_.empty()) {
         current_.swap(incoming_);
         currentSince_ = incomingSince_;
@@ -114,12 +115,13 @@ void Recorder::run() {
 void Recorder::waitForWork() {
   retry_ = options_.firstRetry;
   if (position_ < current_.size()) return;
-  while (incoming_.empty() && !stopping_) {
+  while (incoming_.empty() && !stopping_ && !retention_) {
     asleep_ = true;
     const bool due = !work_.waitUntil(mutex_, std::min(nextMaintenance_, nextVerification_));
     asleep_ = false;
     if (due && incoming_.empty()) return;
   }
+  if (incoming_.empty()) return;
   gather();
 }
 
@@ -181,6 +183,15 @@ bool Recorder::writeCurrent() {
   }
   mutex_.lock();
   return healthy;
+}
+
+void Recorder::takeRetention() {
+  if (!retention_) return;
+  const RecorderOptions retention = *std::exchange(retention_, std::nullopt);
+  mutex_.unlock();
+  writer_.setRetention(retention);
+  nextMaintenance_ = SteadyClock::now();  // what is too much or too old by now goes at once
+  mutex_.lock();
 }
 
 // A piece at a time, then a long rest: what it costs stays below a hundredth of the time.

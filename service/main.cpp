@@ -3,6 +3,7 @@
 //
 // A signal ends the clients in order, with their sessions. The process then ends without tearing the parts down: what
 // the back-ends hold is committed, then it exits at once.
+#include <csignal>
 #include <cstdint>
 #include <cstdlib>
 #include <exception>
@@ -67,15 +68,16 @@ ServiceCounts countsOf(const TarnReportingService& service) {
 
 // Serves until a signal; the exit status.
 int serve(LinuxPlatform& platform, HostSetup& setup) {
-  MainLoop& loop = platform.loop();
   if (const Status started = platform.start(); started.failed()) return refuse(started->text);
   std::shared_ptr<TarnReportingService> service;  // before any signal is served
-  const auto endInOrder = [&platform, &service](int) {
+  const auto heed = [&platform, &service](int signal) {
+    if (signal == SIGHUP) return platform.reload();
     service->announceEnd();
     platform.endClients([&service] { service->endSingleMessageSession(); });
   };
-  const Status heard = SignalSource::start(setup.signals, loop, endInOrder);
-  if (heard.failed()) return refuse(heard->text);
+  if (const Status heard = SignalSource::start(setup.signals, platform.loop(), heed); heard.failed()) {
+    return refuse(heard->text);
+  }
   TarnReportingInstallFacilities(&platform.facilities());
   service = makeService(*setup.log);
   // Only now is there anything to connect to: who can reach the service finds it whole, its notifications heard.
@@ -98,7 +100,9 @@ int run(int argumentCount, char** arguments) {
   if (prepared.failed()) return refuse(prepared->text, prepared->code);
   ServiceManager serviceManager;
   LinuxPlatform platform(setup.configuration, command.options->stateDirectory, setup.deviceProperties,
-                         {setup.clock, *setup.log, serviceManager, [&setup] { setup.settleLog(); }});
+                         {setup.clock, *setup.log, serviceManager, [&setup] { setup.settleLog(); },
+                          [&setup] { return setup.readConfiguration(); },
+                          [&setup](platform::LogLevel level) { setup.setLogLevel(level); }});
   int status = kExitFailure;
   try {
     status = serve(platform, setup);

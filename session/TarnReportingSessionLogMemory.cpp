@@ -26,13 +26,13 @@ constexpr std::size_t kBlockBytes = 16;
 constexpr std::size_t kKeyBytes = 56;
 // So many users are remembered before those that are gone are looked for.
 constexpr std::size_t kKeptUsers = 64;
+constexpr platform::OverflowStore::Bounds kNoBounds;
 
 }  // namespace
 
 TarnReportingSessionLogMemory::TarnReportingSessionLogMemory()
     : store_(TarnReportingFacilities().overflow),
-      bounds_(store_ != nullptr ? store_->bounds() : platform::OverflowStore::Bounds{}),
-      chunkBytes_(std::min(kLargestChunk, bounds_.bytesOfSession / kChunksOfBound)),
+      bounds_(store_ != nullptr ? store_->bounds() : kNoBounds),
       nobodys_(std::make_unique<Share>()) {}
 
 TarnReportingSessionLogMemory::~TarnReportingSessionLogMemory() = default;
@@ -48,6 +48,10 @@ std::shared_ptr<TarnReportingSessionLogAccount> TarnReportingSessionLogMemory::m
     known = share;
   }
   return std::make_shared<TarnReportingSessionLogAccount>(TarnReportingSessionLogAccount{0, std::move(share)});
+}
+
+std::size_t TarnReportingSessionLogMemory::chunkBytes() const noexcept {
+  return std::min(kLargestChunk, bounds_.bytesOfSession / kChunksOfBound);
 }
 
 TarnReportingSessionLogMemory::Share& TarnReportingSessionLogMemory::shareOf(const List& list) noexcept {

@@ -55,7 +55,8 @@ class TarnReportingSessionLogMemory {
     bool operator==(const Usage&) const = default;
   };
 
-  // Takes the store and its bounds from the facilities; without a store nothing is ever moved.
+  // Takes the store from the facilities, and its bounds as they are at each look; without a store nothing is ever
+  // moved.
   TarnReportingSessionLogMemory();
   ~TarnReportingSessionLogMemory();
   TarnReportingSessionLogMemory(const TarnReportingSessionLogMemory&) = delete;
@@ -98,6 +99,9 @@ class TarnReportingSessionLogMemory {
   bool relieveLargest(Share& share);
   bool relieveLargest();
   Share& shareOf(const List& list) noexcept;
+  // That are moved at once: 128 KiB, or an eighth of a session's bound when that is less. Large enough that a page is
+  // worth a write, small enough that two opened pages are no burden.
+  std::size_t chunkBytes() const noexcept;
   // Pages count that the store had no room for.
   std::size_t bytesInMemory() const noexcept { return bytes_ + pageCounts_->bytesInMemory; }
   // After a failure not before memory has grown by a further mebibyte, or a full disk would be asked for every message.
@@ -116,10 +120,7 @@ class TarnReportingSessionLogMemory {
   static void point(List** at, List* list) noexcept;
 
   platform::OverflowStore* const store_;
-  const platform::OverflowStore::Bounds bounds_;
-  // 128 KiB, or an eighth of a session's bound when that is less: large enough that a page is worth a write, small
-  // enough that two opened pages are no burden.
-  const std::size_t chunkBytes_;  // that are moved at once
+  const platform::OverflowStore::Bounds& bounds_;  // the store's own
   std::size_t bytes_ = 0;
   std::size_t overflowing_ = 0;
   std::uint64_t failures_ = 0;

@@ -93,7 +93,7 @@ void TarnReportingSessionMessageList::append(Record record) {
   memory_->add(*this, cost);
   ++openChunk_.records;
   openChunk_.bytes += cost;
-  if (openChunk_.bytes >= memory_->chunkBytes_) {
+  if (openChunk_.bytes >= memory_->chunkBytes()) {
     chunks_.push_back(openChunk_);
     openChunk_ = {};
   }

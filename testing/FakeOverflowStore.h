@@ -18,7 +18,7 @@ namespace tarn::testing {
 
 class FakeOverflowStore final : public platform::OverflowStore {
  public:
-  Bounds bounds() const override { return bounds_; }
+  const Bounds& bounds() const override { return bounds_; }
   Result<Place> write(std::string_view bytes) override {
     const std::lock_guard guard(mutex_);
     ++writesTried_;

@@ -47,6 +47,8 @@ class FrameBuffer {
   // The next whole frame, its length left out. Valid until space() or release() is called.
   Next next(std::span<const std::byte>& frame) noexcept;
 
+  // As it was made with.
+  std::size_t maxFrameBytes() const noexcept { return maxFrameBytes_; }
   // Received bytes that no frame was made of yet: part of one, or frames that nobody has asked for.
   std::size_t pendingBytes() const noexcept { return end_ - begin_; }
   // The length that the unfinished or refused frame announces; 0 while that is not known.

@@ -44,10 +44,13 @@ class LogFloodGuard final : public platform::Log {
   // megabyte.
   static constexpr std::size_t kMostKinds = 4096;
 
-  // Both outlive the guard. The threshold is the next log's, read once here: entries below it aren't formed by anybody.
+  // Both outlive the guard. The threshold is the next log's as it is here: entries below it aren't formed by anybody.
   LogFloodGuard(platform::Log& next, const platform::Clock& clock);
   LogFloodGuard(const LogFloodGuard&) = delete;
   LogFloodGuard& operator=(const LogFloodGuard&) = delete;
+
+  // Likewise from now on; the next log's is set beside. Threads: any.
+  void setLevel(platform::LogLevel level) noexcept { setThreshold(level); }
 
   // Passes the entry on or counts it. What is nobody's, or below the level default, goes on without a look at the table
   // and without the lock; so does what there is no memory to remember. A count of an earlier window is told before the

@@ -43,6 +43,9 @@ class QueuedLog final : public platform::Log {
   // left to be told. So a reader that stalls never keeps the process from ending.
   ~QueuedLog() override;
 
+  // Entries below it are left out from now on. Threads: any.
+  void setLevel(platform::LogLevel level) noexcept { setThreshold(level); }
+
   // Begins to write, on the thread that this makes; what was logged before is kept for that. To be called once; throws
   // when the system has no thread to give.
   void start();

@@ -5,11 +5,27 @@
 
 #include <array>
 #include <cstdio>
+#include <cstdlib>
 
 namespace tarn::linux_host {
 
 void ServiceManager::notifyReady() {
   sd_notify(0, "READY=1");
+}
+
+void ServiceManager::notifyReloading(std::chrono::microseconds monotonicNow) {
+  std::array<char, 64> told{};
+  static_cast<void>(std::snprintf(told.data(), told.size(), "RELOADING=1\nMONOTONIC_USEC=%lld",
+                                  static_cast<long long>(monotonicNow.count())));
+  sd_notify(0, told.data());
+}
+
+void ServiceManager::notifyStatus(const std::string& line) {
+  sd_notify(0, ("STATUS=" + line).c_str());
+}
+
+bool ServiceManager::listens() const {
+  return std::getenv("NOTIFY_SOCKET") != nullptr;
 }
 
 void ServiceManager::notifyStopping(std::chrono::microseconds longest) {

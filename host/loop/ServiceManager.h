@@ -8,14 +8,21 @@
 
 #include <chrono>
 #include <optional>
+#include <string>
 
 namespace tarn::linux_host {
 
 class ServiceManager {
  public:
   virtual ~ServiceManager() = default;
-  // The listener accepts. Told once; a manager that waits for it counts the start as done.
+  // The listener accepts, or a reload is over. A manager that waits for it counts that as done.
   virtual void notifyReady();
+  // The configuration is read anew, from this moment of the monotonic clock on, until notifyReady().
+  virtual void notifyReloading(std::chrono::microseconds monotonicNow);
+  // What the service is at, in one line for people.
+  virtual void notifyStatus(const std::string& line);
+  // Whether anybody is told; nobody is when no manager started the process.
+  virtual bool listens() const;
   // The service is about to end: from now on it takes at most so long. Asks the manager to wait that long before it
   // kills.
   virtual void notifyStopping(std::chrono::microseconds longest);

@@ -13,24 +13,25 @@ namespace tarn::linux_host {
 
 namespace {
 
-sigset_t endingSignals() {
+sigset_t servedSignals() {
   sigset_t signals;
   sigemptyset(&signals);
   sigaddset(&signals, SIGTERM);
   sigaddset(&signals, SIGINT);
+  sigaddset(&signals, SIGHUP);
   return signals;
 }
 
 }  // namespace
 
 SignalSource::SignalSource() {
-  const sigset_t signals = endingSignals();
+  const sigset_t signals = servedSignals();
   pthread_sigmask(SIG_BLOCK, &signals, nullptr);
   std::signal(SIGPIPE, SIG_IGN);
 }
 
 Status SignalSource::start(const std::shared_ptr<SignalSource>& source, MainLoop& loop, Handler handler) {
-  const sigset_t signals = endingSignals();
+  const sigset_t signals = servedSignals();
   source->handler_ = std::move(handler);
   source->descriptor_ = UniqueDescriptor(::signalfd(-1, &signals, SFD_CLOEXEC | SFD_NONBLOCK));
   const Status watched =

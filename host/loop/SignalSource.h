@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// SignalSource: SIGTERM and SIGINT as calls on the main loop's thread; SIGPIPE is ignored for the whole process, so
-// that a peer that has gone is an error of the write.
+// SignalSource: SIGTERM, SIGINT and SIGHUP as calls on the main loop's thread; SIGPIPE is ignored for the whole
+// process, so that a peer that has gone is an error of the write.
 //
 // Made by the entry point before any thread, which then inherits the blocked signals: a thread without that would take
 // the signal and end the process. Threads: the loop's.

@@ -31,7 +31,12 @@ class OverflowFile final : public platform::OverflowStore {
   // Takes at most `share` bytes in the folder. Removes what a process that was killed may have left there.
   OverflowFile(std::string folder, const Bounds& bounds, std::size_t share);
 
-  Bounds bounds() const override { return bounds_; }
+  const Bounds& bounds() const override { return bounds_; }
+  // Other bounds and another share from now on. What the file has beyond its share it keeps. On the server queue.
+  void setBounds(const Bounds& bounds, std::size_t share) noexcept {
+    bounds_ = bounds;
+    share_ = share;
+  }
   Result<Place> write(std::string_view bytes) override;
   Result<std::string> read(Place place) override;
   void remove(Place place) noexcept override;
@@ -59,8 +64,8 @@ class OverflowFile final : public platform::OverflowStore {
   static Run runAt(const Slots& slots, std::size_t index) noexcept;
 
   const std::string folder_;
-  const Bounds bounds_;
-  const std::size_t share_;
+  Bounds bounds_;  // of the server queue alone
+  std::atomic<std::size_t> share_;
   const std::shared_ptr<std::atomic<std::int64_t>> size_ = std::make_shared<std::atomic<std::int64_t>>(0);
 
   Mutex mutex_;

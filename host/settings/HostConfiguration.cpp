@@ -1,24 +1,16 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "host/settings/HostConfiguration.h"
 
-#include <unistd.h>
-
 #include <algorithm>
 #include <array>
-#include <cerrno>
 
+#include "host/log/LogLine.h"
 #include "host/settings/TomlParser.h"
-#include "host/system/FolderNames.h"
-#include "host/system/SmallFile.h"
-#include "host/system/SystemError.h"
 #include "plist/EscapedText.h"
 
 namespace tarn::linux_host {
 
 namespace {
-
-constexpr std::size_t kMaximumFileBytes = std::size_t{1} << 20U;
-constexpr std::size_t kMostDropIns = 256;
 
 // What is wrong with a setting, to stand after its name.
 Error wrong(std::string text) {
@@ -59,6 +51,14 @@ Status take(const toml::node& node, recorder::Redundant& redundant) {
     return wrong("must be \"count\" or \"mark\"");
   }
   return {};
+}
+
+Status take(const toml::node& node, platform::LogLevel& level) {
+  std::string name;
+  if (Status taken = take(node, name); taken.failed()) return taken;
+  const auto known = logLevelFromName(name);
+  level = known.value_or(level);
+  return known ? Status() : wrong("must be debug, info, default or error");
 }
 
 Status takePath(const toml::node& node, const char* what, std::optional<std::string>& path) {
@@ -110,83 +110,160 @@ Status takeMilliseconds(const toml::node& node, std::chrono::milliseconds& setti
   return taken;
 }
 
-Status takeDelay(const toml::node& node, std::chrono::milliseconds& setting) {
-  return takeMilliseconds<0, 3'600'000>(node, setting);
-}
+using Node = const toml::node&;
+using Host = HostConfiguration&;
 
-Status takeRate(const toml::node& node, std::size_t& setting) {
-  return takeWithin<0, 1'000'000'000>(node, setting);
-}
+// How a setting is taken from the file, where nothing is said but its type.
+struct Take {
+  template <class Value>
+  Status operator()(Node node, Value& setting) const {
+    return take(node, setting);
+  }
+};
 
-constexpr std::int64_t kMostBytes = std::int64_t{1} << 40U;
+template <std::int64_t kLowest, std::int64_t kHighest>
+struct Within {
+  template <class Value>
+  Status operator()(Node node, Value& setting) const {
+    return takeWithin<kLowest, kHighest>(node, setting);
+  }
+  Status operator()(Node node, std::chrono::milliseconds& setting) const {
+    return takeMilliseconds<kLowest, kHighest>(node, setting);
+  }
+};
+
+struct TakeFile {
+  Status operator()(Node node, std::optional<std::string>& setting) const { return takePath(node, "a file", setting); }
+};
 
 struct Setting {
   std::string_view section;
   std::string_view key;
-  Status (*apply)(const toml::node& node, HostConfiguration& configuration);
+  SettingEffect effect;
+  Status (*apply)(Node node, Host configuration);
+  // Makes it the same in `to` as in `from`; whether it was another one there.
+  bool (*bring)(const HostConfiguration& from, Host to);
+  bool (*differs)(const HostConfiguration& one, const HostConfiguration& other);
 };
 
-using Node = const toml::node&;
-using Host = HostConfiguration&;
-constexpr std::array<Setting, 33> kSettings{{
-    {"tally", "in_use", [](Node node, Host host) { return take(node, host.tally.inUse); }},
-    {"rtc", "backends", [](Node node, Host host) { return take(node, host.rtc.backends); }},
-    {"rtc", "no_backends", [](Node node, Host host) { return take(node, host.rtc.noBackends); }},
-    {"rtc", "available", [](Node node, Host host) { return take(node, host.rtc.available); }},
-    {"rtc", "start_delay_ms", [](Node node, Host host) { return takeDelay(node, host.rtc.startDelay); }},
-    {"snare", "refuse", [](Node node, Host host) { return take(node, host.snare.refuse); }},
-    {"paths", "diagnostic_logs", [](Node node, Host host) { return take(node, host.paths.diagnosticLogs); }},
-    {"paths", "flume", [](Node node, Host host) { return take(node, host.paths.flume); }},
-    {"paths", "alsa", [](Node node, Host host) { return take(node, host.paths.alsa); }},
-    {"paths", "trace_analysis",
-     [](Node node, Host host) { return takePath(node, "a file", host.paths.traceAnalysis); }},
-    {"recorder", "enabled", [](Node node, Host host) { return take(node, host.recorderEnabled); }},
-    {"recorder", "max_megabytes",
-     [](Node node, Host host) { return takeWithin<1, 1048576>(node, host.recorder.maxMegabytes); }},
-    {"recorder", "max_age_days",
-     [](Node node, Host host) { return takeWithin<1, 36500>(node, host.recorder.maxAgeDays); }},
-    {"recorder", "summary_max_age_days",
-     [](Node node, Host host) { return takeWithin<1, 36500>(node, host.recorder.summaryMaxAgeDays); }},
-    {"recorder", "redundant", [](Node node, Host host) { return take(node, host.recorder.redundant); }},
-    {"recorder", "set_aside_max_age_days",
-     [](Node node, Host host) { return takeWithin<1, 36500>(node, host.recorder.fileMaxAges.setAside); }},
-    {"recorder", "summary_file_max_age_days",
-     [](Node node, Host host) { return takeWithin<1, 36500>(node, host.recorder.fileMaxAges.summaryFiles); }},
-    {"recorder", "trace_max_age_days",
-     [](Node node, Host host) { return takeWithin<1, 36500>(node, host.recorder.fileMaxAges.traces); }},
-    {"recorder", "perf_data_max_age_days",
-     [](Node node, Host host) { return takeWithin<1, 36500>(node, host.recorder.fileMaxAges.perfData); }},
-    {"limits", "max_frame_bytes",
-     [](Node node, Host host) { return takeWithin<64, 67108864>(node, host.limits.maxFrameBytes); }},
-    {"limits", "half_frame_ms",
-     [](Node node, Host host) { return takeMilliseconds<100, 3'600'000>(node, host.limits.halfFrameTime); }},
-    {"limits", "connections_per_user",
-     [](Node node, Host host) { return takeWithin<1, 65536>(node, host.limits.quotas.connectionsPerUser); }},
-    {"limits", "sessions_per_connection",
-     [](Node node, Host host) { return takeWithin<1, 16777216>(node, host.limits.quotas.sessionsPerConnection); }},
-    {"limits", "sessions_per_user",
-     [](Node node, Host host) { return takeWithin<1, 16777216>(node, host.limits.quotas.sessionsPerUser); }},
-    {"limits", "waiting_bytes_per_user",
-     [](Node node, Host host) { return takeWithin<65536, 1073741824>(node, host.limits.quotas.waitingBytesPerUser); }},
-    {"limits", "waiting_bytes",
-     [](Node node, Host host) { return takeWithin<65536, 1073741824>(node, host.limits.quotas.waitingBytes); }},
-    {"limits", "log_bytes_per_session",
-     [](Node node, Host host) { return takeWithin<65536, kMostBytes>(node, host.limits.logs.bytesOfSession); }},
-    {"limits", "log_bytes",
-     [](Node node, Host host) { return takeWithin<65536, kMostBytes>(node, host.limits.logs.bytesInAll); }},
-    {"limits", "log_share_per_user",
-     [](Node node, Host host) { return takeWithin<65536, kMostBytes>(node, host.limits.logs.bytesOfUser); }},
-    {"limits", "log_bytes_per_connection",
-     [](Node node, Host host) {
-       return takeWithin<65536, kMostBytes>(node, host.limits.quotas.logBytesPerConnection);
-     }},
-    {"limits", "log_bytes_per_user",
-     [](Node node, Host host) { return takeWithin<65536, kMostBytes>(node, host.limits.quotas.logBytesPerUser); }},
-    {"limits", "messages_per_second_per_connection",
-     [](Node node, Host host) { return takeRate(node, host.limits.quotas.messagesPerSecondPerConnection); }},
-    {"limits", "messages_per_second_per_user",
-     [](Node node, Host host) { return takeRate(node, host.limits.quotas.messagesPerSecondPerUser); }},
-}};
+// `member` picks the setting out of a configuration, `taken` reads it.
+template <class Member, class Taken>
+constexpr Setting setting(std::string_view section, std::string_view key, SettingEffect effect, Member /*member*/,
+                          Taken /*taken*/) {
+  return {
+      section,
+      key,
+      effect,
+      [](Node node, Host host) { return Taken()(node, Member()(host)); },
+      [](const HostConfiguration& from, Host to) {
+        const bool differed = !(Member()(from) == Member()(to));
+        Member()(to) = Member()(from);
+        return differed;
+      },
+      [](const HostConfiguration& one, const HostConfiguration& other) { return !(Member()(one) == Member()(other)); }};
+}
+
+using Quota = Within<1, 16777216>;
+using WaitingBytes = Within<65536, 1073741824>;
+using LogBytes = Within<65536, std::int64_t{1} << 40U>;
+using Rate = Within<0, 1'000'000'000>;
+using Days = Within<1, 36500>;
+
+constexpr auto kAtOnce = SettingEffect::AtOnce;
+constexpr auto kNewOnes = SettingEffect::NewOnes;
+constexpr auto kAtRestart = SettingEffect::AtRestart;
+
+constexpr std::array kSettings{
+    setting(
+        "log", "level", kAtOnce, [](auto& host) -> auto& { return host.logLevel; }, Take()),
+    setting(
+        "tally", "in_use", kAtOnce, [](auto& host) -> auto& { return host.tally.inUse; }, Take()),
+    setting(
+        "rtc", "backends", kNewOnes, [](auto& host) -> auto& { return host.rtc.backends; }, Take()),
+    setting(
+        "rtc", "no_backends", kNewOnes, [](auto& host) -> auto& { return host.rtc.noBackends; }, Take()),
+    setting(
+        "rtc", "available", kNewOnes, [](auto& host) -> auto& { return host.rtc.available; }, Take()),
+    setting(
+        "rtc", "start_delay_ms", kAtRestart, [](auto& host) -> auto& { return host.rtc.startDelay; },
+        Within<0, 3'600'000>()),
+    setting(
+        "snare", "refuse", kAtOnce, [](auto& host) -> auto& { return host.snare.refuse; }, Take()),
+    setting(
+        "paths", "diagnostic_logs", kAtRestart, [](auto& host) -> auto& { return host.paths.diagnosticLogs; }, Take()),
+    setting(
+        "paths", "flume", kAtRestart, [](auto& host) -> auto& { return host.paths.flume; }, Take()),
+    setting(
+        "paths", "alsa", kAtRestart, [](auto& host) -> auto& { return host.paths.alsa; }, Take()),
+    setting(
+        "paths", "trace_analysis", kAtRestart, [](auto& host) -> auto& { return host.paths.traceAnalysis; },
+        TakeFile()),
+    setting(
+        "recorder", "enabled", kAtRestart, [](auto& host) -> auto& { return host.recorderEnabled; }, Take()),
+    setting(
+        "recorder", "max_megabytes", kAtOnce, [](auto& host) -> auto& { return host.recorder.maxMegabytes; },
+        Within<1, 1048576>()),
+    setting(
+        "recorder", "max_age_days", kAtOnce, [](auto& host) -> auto& { return host.recorder.maxAgeDays; }, Days()),
+    setting(
+        "recorder", "summary_max_age_days", kAtOnce,
+        [](auto& host) -> auto& { return host.recorder.summaryMaxAgeDays; }, Days()),
+    setting(
+        "recorder", "redundant", kAtRestart, [](auto& host) -> auto& { return host.recorder.redundant; }, Take()),
+    setting(
+        "recorder", "set_aside_max_age_days", kAtRestart,
+        [](auto& host) -> auto& { return host.recorder.fileMaxAges.setAside; }, Days()),
+    setting(
+        "recorder", "summary_file_max_age_days", kAtRestart,
+        [](auto& host) -> auto& { return host.recorder.fileMaxAges.summaryFiles; }, Days()),
+    setting(
+        "recorder", "trace_max_age_days", kAtRestart,
+        [](auto& host) -> auto& { return host.recorder.fileMaxAges.traces; }, Days()),
+    setting(
+        "recorder", "perf_data_max_age_days", kAtRestart,
+        [](auto& host) -> auto& { return host.recorder.fileMaxAges.perfData; }, Days()),
+    setting(
+        "limits", "max_frame_bytes", kNewOnes, [](auto& host) -> auto& { return host.limits.maxFrameBytes; },
+        Within<64, 67108864>()),
+    setting(
+        "limits", "half_frame_ms", kAtOnce, [](auto& host) -> auto& { return host.limits.halfFrameTime; },
+        Within<100, 3'600'000>()),
+    setting(
+        "limits", "connections_per_user", kAtOnce,
+        [](auto& host) -> auto& { return host.limits.quotas.connectionsPerUser; }, Within<1, 65536>()),
+    setting(
+        "limits", "sessions_per_connection", kAtOnce,
+        [](auto& host) -> auto& { return host.limits.quotas.sessionsPerConnection; }, Quota()),
+    setting(
+        "limits", "sessions_per_user", kAtOnce, [](auto& host) -> auto& { return host.limits.quotas.sessionsPerUser; },
+        Quota()),
+    setting(
+        "limits", "waiting_bytes_per_user", kAtOnce,
+        [](auto& host) -> auto& { return host.limits.quotas.waitingBytesPerUser; }, WaitingBytes()),
+    setting(
+        "limits", "waiting_bytes", kAtOnce, [](auto& host) -> auto& { return host.limits.quotas.waitingBytes; },
+        WaitingBytes()),
+    setting(
+        "limits", "log_bytes_per_session", kAtOnce, [](auto& host) -> auto& { return host.limits.logs.bytesOfSession; },
+        LogBytes()),
+    setting(
+        "limits", "log_bytes", kAtOnce, [](auto& host) -> auto& { return host.limits.logs.bytesInAll; }, LogBytes()),
+    setting(
+        "limits", "log_share_per_user", kAtOnce, [](auto& host) -> auto& { return host.limits.logs.bytesOfUser; },
+        LogBytes()),
+    setting(
+        "limits", "log_bytes_per_connection", kAtOnce,
+        [](auto& host) -> auto& { return host.limits.quotas.logBytesPerConnection; }, LogBytes()),
+    setting(
+        "limits", "log_bytes_per_user", kAtOnce, [](auto& host) -> auto& { return host.limits.quotas.logBytesPerUser; },
+        LogBytes()),
+    setting(
+        "limits", "messages_per_second_per_connection", kAtOnce,
+        [](auto& host) -> auto& { return host.limits.quotas.messagesPerSecondPerConnection; }, Rate()),
+    setting(
+        "limits", "messages_per_second_per_user", kAtOnce,
+        [](auto& host) -> auto& { return host.limits.quotas.messagesPerSecondPerUser; }, Rate()),
+};
 
 bool isSection(std::string_view name) {
   for (const Setting& setting : kSettings) {
@@ -256,30 +333,32 @@ class Reader {
   Fault fault_;
 };
 
-bool isDropIn(std::string_view name) {
-  return !name.starts_with('.') && name.ends_with(".toml");
-}
-
-// Their paths, in order; none where there is no such folder.
-Result<std::vector<std::string>> dropInsOf(const std::string& path) {
-  const std::string folder = path + ".d";
-  const Result<FolderNames> listed = folderNames(folder, kMostDropIns, isDropIn);
-  if (listed.failed() && listed.error->code == ENOENT) return {};
-  if (listed.failed()) return {{}, errorOf(folder, *listed.error)};
-  if (!listed.value.complete) return {{}, Error{0, folder + ": too many files"}};
-  std::vector<std::string> paths;
-  for (const std::string& name : listed.value.names) {
-    paths.push_back(folder + "/" + name);
-  }
-  return {std::move(paths), {}};
-}
-
-// Also when it only can't be told: reading it says what is wrong.
-bool isThere(const std::string& path) {
-  return ::access(path.c_str(), F_OK) == 0 || (errno != ENOENT && errno != ENOTDIR);
-}
-
 }  // namespace
+
+std::string_view nameOf(SettingEffect effect) noexcept {
+  constexpr std::array<std::string_view, 3> kNames{"at once", "new ones", "restart"};
+  return kNames[static_cast<std::size_t>(effect)];
+}
+
+std::vector<SettingDescription> describedSettings() {
+  std::vector<SettingDescription> described;
+  for (const Setting& setting : kSettings) {
+    described.push_back({setting.section, setting.key, setting.effect});
+  }
+  return described;
+}
+
+SettingChanges adoptSettings(HostConfiguration& inForce, const HostConfiguration& read) {
+  SettingChanges changes;
+  for (const Setting& setting : kSettings) {
+    const bool waits = setting.effect == SettingEffect::AtRestart;
+    if (waits ? setting.differs(inForce, read) : setting.bring(read, inForce)) {
+      (waits ? changes.waiting : changes.taken)
+          .push_back(std::string(setting.section) + "." + std::string(setting.key));
+    }
+  }
+  return changes;
+}
 
 Result<HostConfiguration> parseConfiguration(std::string_view text, std::string_view name,
                                              const HostConfiguration& base) {
@@ -298,26 +377,6 @@ Result<HostConfiguration> parseConfiguration(std::string_view text, std::string_
   std::string error = std::string(name) + ":" + std::to_string(fault.line) + ": ";
   plist::appendEscapedControls(error, fault.text);  // keys may hold line ends, an error is one line
   return {{}, Error{0, std::move(error)}};
-}
-
-Result<HostConfiguration> readConfiguration(const std::string& path, const HostConfiguration& base) {
-  const auto file = readSmallFile(path, kMaximumFileBytes);
-  if (file.failed()) return {{}, errorOf(path, *file.error)};
-  return parseConfiguration(file.value, path, base);
-}
-
-Result<HostConfiguration> readConfigurationWithDropIns(const std::string& path, bool mayBeAbsent) {
-  Result<std::vector<std::string>> files = dropInsOf(path);
-  if (files.failed()) return {{}, std::move(files.error)};
-  if (!mayBeAbsent || isThere(path)) {
-    files.value.insert(files.value.begin(), path);
-  }
-  Result<HostConfiguration> read;
-  for (const std::string& file : files.value) {
-    read = readConfiguration(file, read.value);
-    if (read.failed()) return {{}, std::move(read.error)};
-  }
-  return read;
 }
 
 }  // namespace tarn::linux_host

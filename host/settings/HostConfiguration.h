@@ -6,12 +6,14 @@
 // Reading changes nothing but what it returns. Threads: any; plain data.
 #pragma once
 
+#include <cstdint>
 #include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
 
 #include "host/socket/HostLimits.h"
+#include "platform/Log.h"
 #include "platform/SnareService.h"
 #include "plist/Result.h"
 #include "recorder/RecorderOptions.h"
@@ -40,6 +42,8 @@ struct HostConfiguration {
     bool operator==(const Paths&) const = default;
   };
 
+  // [log]: from what level on is logged; the option of that name has the last word.
+  platform::LogLevel logLevel = platform::LogLevel::Default;
   Tally tally;
   // [rtc]: how the stand-in for real-time-communication reporting answers.
   tarn::recorder::RecorderRtcReportingService::Behaviour rtc;
@@ -53,6 +57,35 @@ struct HostConfiguration {
 
   bool operator==(const HostConfiguration&) const = default;
 };
+
+// When a running service that reads its configuration anew takes over a change of a setting. Each setting says it in
+// the table of settings; documents and log lines come from there.
+enum class SettingEffect : std::uint8_t {
+  AtOnce,     // for what is there too
+  NewOnes,    // for sessions that start and connections that come
+  AtRestart,  // not while it runs
+};
+// "at once", "new ones" or "restart", as the documents say it.
+std::string_view nameOf(SettingEffect effect) noexcept;
+
+struct SettingDescription {
+  std::string_view section;
+  std::string_view key;
+  SettingEffect effect;
+};
+// All of them, in the order of the documents.
+std::vector<SettingDescription> describedSettings();
+
+// Names of settings, "section.key".
+struct SettingChanges {
+  std::vector<std::string> taken;
+  std::vector<std::string> waiting;  // for a restart
+
+  bool operator==(const SettingChanges&) const = default;
+};
+// Takes over into `inForce` what may change while the service runs; what changed, and what is another one than what is
+// in force and stays so until a restart.
+SettingChanges adoptSettings(HostConfiguration& inForce, const HostConfiguration& read);
 
 // Reads the file; at most 1 MiB. An error reads "NAME:LINE: what is wrong", in one line whatever the file holds, and is
 // the one that stands first in the file; or "NAME: why it can't be read". Then the defaults stand beside it. A file

@@ -54,7 +54,7 @@ void addOptions(CLI::App& app, ServiceOptionTexts& raw) {
       ->type_name("FILE")
       ->check(checkNotEmpty);
   app.add_option("--log-level", raw.logLevel,
-                 "Least level that is logged: debug, info, default or error (default: default)")
+                 "Least level that is logged: debug, info, default or error (default: as the configuration says)")
       ->type_name("LEVEL")
       ->check(checkLevel);
   app.add_option("--log-target", raw.logTarget,
@@ -109,7 +109,7 @@ ServiceCommand parseServiceCommand(int argumentCount, const char* const* argumen
   options.defaultConfigurationFile = defaultConfigurationFile(environment);
   options.devicePropertiesFile = orNothing(raw.devicePropertiesFile);
   options.defaultDevicePropertiesFile = defaultDevicePropertiesFile(environment);
-  options.logLevel = *logLevelFromName(raw.logLevel);
+  options.logLevel = logLevelFromName(raw.logLevel);
   options.logTarget = raw.logTarget;
   return {std::move(options), {}, {}};
 }

@@ -37,7 +37,7 @@ struct ServiceOptions {
   std::optional<std::string> devicePropertiesFile;
   std::string defaultDevicePropertiesFile;
   // What is logged, from this level on, and where: "stderr", "journal" or a file's path.
-  platform::LogLevel logLevel = platform::LogLevel::Default;
+  std::optional<platform::LogLevel> logLevel;  // nothing: as the configuration says
   std::string logTarget = "stderr";
 };
 
@@ -54,7 +54,7 @@ struct ServiceOptionTexts {
   std::string stateDirectory;
   std::string configurationFile;
   std::string devicePropertiesFile;
-  std::string logLevel = "default";
+  std::string logLevel;
   std::string logTarget = "stderr";
 };
 

@@ -88,6 +88,16 @@ class ConnectionHost {
     }
   }
 
+  // Takes over the bounds that may change while the service runs: the quotas and those of half frames at once, the
+  // longest frame for connections that come. Who has more than a quota by now keeps it, and gets no more.
+  void adopt(const HostLimits& changed) {
+    limits.maxFrameBytes = changed.maxFrameBytes;
+    limits.quotas = changed.quotas;
+    limits.halfFrameTime = changed.halfFrameTime;
+    halfFrames.setBounds(changed.halfFrameTime, changed.quotas.waitingBytes);
+    watchHalfFrames();
+  }
+
   // The quotas with what everybody has of them now; part of `status`.
   plist::Dictionary quotaUse() {
     shares.forEachParty([](ShareParty& party) { party.largestLog = 0; });
@@ -146,7 +156,7 @@ class ConnectionHost {
   // The parts that connections use, open to them: each has its own header and says there what it does.
   MainLoop& loop;
   platform::Log& log;
-  const HostLimits limits;
+  HostLimits limits;  // changed by adopt() alone
   Ledger ledger;
   ConnectionGate gate;
   FairShares shares;

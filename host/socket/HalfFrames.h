@@ -48,6 +48,11 @@ class HalfFrames {
 
   // `longest` is how long a half frame may wait for the rest, `maxBytes` what all of them may take together.
   HalfFrames(Moment longest, std::size_t maxBytes) noexcept : longest_(longest), maxBytes_(maxBytes) {}
+  // Other bounds, for those that wait too, from the next sweep on.
+  void setBounds(Moment longest, std::size_t maxBytes) noexcept {
+    longest_ = longest;
+    maxBytes_ = maxBytes;
+  }
   HalfFrames(const HalfFrames&) = delete;
   HalfFrames& operator=(const HalfFrames&) = delete;
 
@@ -96,8 +101,8 @@ class HalfFrames {
   std::size_t bytes() const noexcept { return bytes_; }
 
  private:
-  const Moment longest_;
-  const std::size_t maxBytes_;
+  Moment longest_;
+  std::size_t maxBytes_;
   std::list<Entry> entries_;  // the one that has waited longest first
   // Of all entries.
   std::size_t bytes_ = 0;

@@ -251,7 +251,7 @@ bool SocketConnection::serveNextFrame() {
     case wire::FrameBuffer::Next::Oversize:
       cut(CutReason::OversizeFrame, [this] {
         return "frame of " + std::to_string(frames_.announcedBytes()) + " bytes, " +
-               std::to_string(host_.limits.maxFrameBytes) + " are allowed";
+               std::to_string(frames_.maxFrameBytes()) + " are allowed";
       });
       return true;
   }

@@ -144,6 +144,7 @@ class EventFile {
   // What the database may take, and how large its log grows before it is brought in while commits go on. At twice the
   // size they wait for it. Bytes; from the next expire() and checkpointIfDue() on.
   void setMaxBytes(std::int64_t maxBytes) noexcept { retention_.setMaxBytes(maxBytes); }
+  void setLimits(const RetentionLimits& limits) noexcept { retention_.setLimits(limits); }
   void setLogLimit(std::int64_t bytes) noexcept { logLimit_ = bytes; }
   // Of the log after the last commit, in bytes; a reader that holds on to an old state keeps it from starting again,
   // and so it grows.

@@ -55,6 +55,8 @@ class Retention {
 
   // As what lies beside the database takes more or less of the cap; holds from the next expire() on.
   void setMaxBytes(std::int64_t maxBytes) noexcept { limits_.maxBytes = maxBytes; }
+  // Other limits, likewise.
+  void setLimits(const RetentionLimits& limits) noexcept { limits_ = limits; }
   // For sessions whose events are gone: how old their rows get, and how many there may be, so that they take a
   // thirtieth of the limit or so.
   double maxAgeSeconds() const noexcept { return limits_.maxAgeSeconds; }

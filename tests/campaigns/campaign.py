@@ -42,6 +42,7 @@ CAMPAIGNS = {
     "streams": ("streams", "200 streams a minute of a real PipeWire: a session each, as long as it ran, none open"),
     "ends": ("ends", "SIGTERM at random moments under load: all that was answered is there, once"),
     "restarts": ("restarts", "restarts with the socket kept, under 5,000 messages a second of the libraries' programs"),
+    "reloads": ("reloads", "the configuration is read anew under load, a tenth broken: no client notices"),
 }
 
 

@@ -70,6 +70,25 @@ TEST_F(HostSetupTest, DropInsAreReadOfWhicheverConfigurationIsUsed) {
   EXPECT_EQ(statusOf(installed, ""), 0);
 }
 
+TEST_F(HostSetupTest, AnOptionHasTheLastWordOverTheFileAlsoWhenThatIsReadAnew) {
+  folder_.write("c.toml", "[log]\nlevel = \"error\"\n");
+  ServiceOptions named = options();
+  named.configurationFile = folder_.path("c.toml");
+  const auto levelsOf = [&](const ServiceOptions& given) {
+    return testing::inChild([&] {
+      HostSetup setup;
+      if (setup.prepare(given).failed()) return 99;
+      const int before = static_cast<int>(setup.log->threshold());
+      folder_.write("c.toml", "[log]\nlevel = \"info\"\n");
+      setup.setLogLevel(setup.readConfiguration().value.logLevel);
+      return before * 10 + static_cast<int>(setup.log->threshold());
+    });
+  };
+  EXPECT_EQ(levelsOf(named), 31);
+  named.logLevel = platform::LogLevel::Debug;
+  EXPECT_EQ(levelsOf(named), 0);
+}
+
 TEST_F(HostSetupTest, WhatIsMadeIsForUserAndGroupAlone) {
   const int status = testing::inChild([&] {
     ::umask(0);

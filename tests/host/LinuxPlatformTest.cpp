@@ -53,7 +53,14 @@ class LinuxPlatformTest : public ::testing::Test {
   // The configuration is set by tests before this.
   LinuxPlatform& make() {
     platform_.emplace(configuration_, folder_.path(), JsonDeviceProperties(),
-                      LinuxPlatform::Ground{clock_, log_, manager_});
+                      LinuxPlatform::Ground{clock_,
+                                            log_,
+                                            manager_,
+                                            {},
+                                            [this] {
+                                              return Result<HostConfiguration>{next_, {}};
+                                            },
+                                            [this](platform::LogLevel level) { level_ = level; }});
     service_ = std::make_shared<testing::RecordingService>(platform_->loop().queue());
     return *platform_;
   }
@@ -113,6 +120,8 @@ class LinuxPlatformTest : public ::testing::Test {
   LinuxClock clock_;
   NotedManager manager_;
   HostConfiguration configuration_;
+  HostConfiguration next_;  // as the files have it when they are read anew
+  platform::LogLevel level_ = platform::LogLevel::Default;
   std::promise<void> letGo_;
   std::optional<LinuxPlatform> platform_;
   std::shared_ptr<testing::RecordingService> service_;
@@ -343,6 +352,46 @@ TEST_F(LinuxPlatformTest, ExitOfTheProcessMakesSafeWhatWasTaken) {
   EXPECT_EQ(status, 2);
   EXPECT_EQ(recorded(), (std::vector<std::string>{"wattlog event"}));
   EXPECT_FALSE(std::filesystem::exists(socket()));
+}
+
+TEST_F(LinuxPlatformTest, ReloadReachesEveryPartThatTakesSomethingOver) {
+  make();
+  next_.logLevel = platform::LogLevel::Debug;
+  next_.tally.inUse = {"wanted"};
+  next_.rtc.available = false;
+  next_.limits.quotas.sessionsPerUser = 9;
+  next_.limits.logs.bytesInAll = 65'536;
+  next_.limits.maxFrameBytes = 100;
+  next_.paths.flume = "/elsewhere";
+  ASSERT_EQ(platform_->start().text(), "");
+  ASSERT_EQ(listen(), "");
+  platform_->loop().queue()->async([this] { platform_->reload(); });
+  serve();
+  TestClient client(socket());
+  ASSERT_TRUE(eventually([&] { return client.status()->get("configuration_generation") == plist::ValueView(1); }));
+  const plist::Dictionary limits = client.status()->get("quotas").dictionary().get("limits").dictionary();
+  EXPECT_EQ(limits.get("sessions_per_user"), plist::ValueView(9));
+  EXPECT_EQ(client.status()->get("configuration_waiting").asText(), "(paths.flume)");
+  stop();
+  const platform::Facilities& facilities = platform_->facilities();
+  EXPECT_EQ(level_, platform::LogLevel::Debug);
+  EXPECT_TRUE(facilities.tally.eventIsInUse("wanted"));
+  EXPECT_FALSE(facilities.tally.eventIsInUse("another"));
+  EXPECT_EQ(facilities.rtcReporting->newHierarchyToken({}), std::nullopt);
+  EXPECT_EQ(facilities.overflow->bounds().bytesInAll, 65'536U);
+}
+
+TEST_F(LinuxPlatformTest, NothingIsReloadedWhileTheClientsEnd) {
+  make();
+  ASSERT_EQ(platform_->start().text(), "");
+  ASSERT_EQ(listen(), "");
+  next_.logLevel = platform::LogLevel::Debug;
+  platform_->loop().queue()->async([this] {
+    platform_->endClients([] {});
+    platform_->reload();
+  });
+  platform_->serve();
+  EXPECT_EQ(level_, platform::LogLevel::Default);
 }
 
 TEST_F(LinuxPlatformTest, HandsOutEverythingThatAMachineHasOnTheConfiguredPaths) {

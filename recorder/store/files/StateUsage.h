@@ -46,6 +46,8 @@ class StateUsage {
   // Looks at all of it and removes what is too old or beyond its kind's share; what was removed. A file that can't be
   // removed is passed over, and counts.
   std::vector<Removed> tidy(const AgeOf& ageOf);
+  // Another cap from the next tidy() on.
+  void setCap(std::int64_t cap) noexcept { cap_ = cap; }
   // What the database may take beside a log of this size, as of the last tidy(); a fourth of the cap at the least.
   std::int64_t databaseBytes(std::int64_t logBytes) const noexcept;
 
@@ -54,7 +56,7 @@ class StateUsage {
   const FileKind aside_;
   const std::vector<FileKind> kinds_;
   // Bytes, of everything together.
-  const std::int64_t cap_;
+  std::int64_t cap_;
   const Others others_;
   std::int64_t beside_ = 0;  // of all but the database and its log
 };

@@ -35,6 +35,8 @@ TEST(HostConfiguration, EmptyFileHasEveryDefault) {
 
 TEST(HostConfiguration, EverySettingIsRead) {
   const Result<HostConfiguration> read = parseConfiguration(R"(
+[log]
+level = "info"
 [tally]
 in_use = ["sys.oxbow.*", "other"]
 [rtc]
@@ -64,6 +66,7 @@ max_frame_bytes = 65536
                                                             "c.toml");
   ASSERT_TRUE(read.ok()) << read.error->text;
   const HostConfiguration& host = read.value;
+  EXPECT_EQ(host.logLevel, platform::LogLevel::Info);
   EXPECT_EQ(host.tally.inUse, (std::vector<std::string>{"sys.oxbow.*", "other"}));
   EXPECT_TRUE(host.rtc.backends.empty());
   EXPECT_TRUE(host.rtc.noBackends);

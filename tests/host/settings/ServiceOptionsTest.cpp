@@ -69,7 +69,7 @@ TEST(ServiceOptions, DefaultsFollowTheUsersFolders) {
   EXPECT_EQ(command.options->stateDirectory, "/srv/u/state/tarnreporting");
   EXPECT_FALSE(command.options->configurationFile);
   EXPECT_FALSE(command.options->devicePropertiesFile);
-  EXPECT_EQ(command.options->logLevel, platform::LogLevel::Default);
+  EXPECT_EQ(command.options->logLevel, std::nullopt);
   EXPECT_EQ(command.options->logTarget, "stderr");
 }
 

@@ -19,7 +19,7 @@ class WatchedStore final : public platform::OverflowStore {
 
   explicit WatchedStore(FakeOverflowStore& store) : store_(store) {}
 
-  Bounds bounds() const override { return store_.bounds(); }
+  const Bounds& bounds() const override { return store_.bounds(); }
   Result<Place> write(std::string_view bytes) override {
     show(Call::Write);
     Result<Place> written = store_.write(bytes);
