@@ -7,6 +7,7 @@
 #include <utility>
 
 #include "plist/formats/Json.h"
+#include "recorder/WriterLimits.h"
 #include "recorder/store/files/Remedy.h"
 
 namespace tarn::recorder {
@@ -14,9 +15,6 @@ namespace tarn::recorder {
 namespace {
 
 using SteadyClock = std::chrono::steady_clock;
-
-constexpr std::int64_t kMegabyte = std::int64_t{1} << 20;
-constexpr double kSecondsADay = 86'400;
 
 // How long the events and the deletions of one transaction may take; the file's own synchronising comes on top.
 constexpr std::chrono::milliseconds kInsertTime{50};
@@ -29,31 +27,6 @@ constexpr std::size_t kEventsBetweenLooks = 64;
 constexpr std::string_view kMessages = "tally";
 // Something that goes wrong again right after it was put right waits for the next try.
 constexpr int kTriesAtOnce = 5;
-
-std::int64_t capOf(const RecorderOptions& options) {
-  return std::max<std::int64_t>(options.maxMegabytes, 1) * kMegabyte;
-}
-
-RetentionLimits limitsOf(const RecorderOptions& options) {
-  return {capOf(options), options.maxAgeDays * kSecondsADay,
-          std::max(options.summaryMaxAgeDays, options.maxAgeDays) * kSecondsADay};
-}
-
-// One transaction of a small file must not outgrow what retention keeps free.
-std::int64_t transactionBytes(const RecorderOptions& options) {
-  return std::clamp(capOf(options) / 16, std::int64_t{1} << 16, std::int64_t{1} << 23);
-}
-
-// Beyond this the log is brought in, and beyond twice as much commits wait for it.
-std::int64_t logLimit(const RecorderOptions& options) {
-  return std::clamp(capOf(options) / 32, std::int64_t{1} << 16, std::int64_t{1} << 24);
-}
-
-// Nor may the log, which takes one transaction more than its limits.
-std::int64_t logReserve(const RecorderOptions& options) {
-  constexpr std::int64_t kPages = std::int64_t{1} << 17;  // that a transaction touches beside its events
-  return 2 * (logLimit(options) + transactionBytes(options)) + kPages;
-}
 
 }  // namespace
 
@@ -177,8 +150,8 @@ void EventWriter::tellLongLog() {
     for (const std::string& reader : readersOf(file_.path())) {
       readers += (readers.empty() ? "" : ", ") + reader;
     }
-    log_.error("recorder file " + file_.path().string() + " has a log of " +
-               std::to_string(file_.logBytes() / kMegabyte) + " MiB, held up by readers of an old state: " +
+    log_.error("recorder file " + file_.path().string() + " has a log of " + std::to_string(file_.logBytes() >> 20U) +
+               " MiB, held up by readers of an old state: " +
                (readers.empty() ? "none that can be seen" : "process " + readers));
   }
   longLogTold_ = isLong;

@@ -82,8 +82,7 @@ class Recorder {
   void shutdown();
 
   // Hands an event over, before start() too; `backend` must be a text that lives for ever, `time` is in epoch seconds.
-  // After shutdown() the event counts as failed; and so does one that there is no memory for, which throws. Threads:
-  // any.
+  // After shutdown() the event counts as failed, as does one without memory for it, which throws. Threads: any.
   void record(std::string_view backend, std::string_view name, plist::Dictionary payload, plist::Dictionary detail,
               double time);
   // Whether messages that repeat earlier ones are to be noted. Threads: any.
@@ -95,8 +94,7 @@ class Recorder {
   // look at the clock while events wait; asked for each request. It stays true until the low marks are reached and the
   // room handler is called. Threads: any.
   bool isFull() noexcept;
-  // Whether it will soon be full, if those that bring in most go on: from three quarters of the high marks on. Threads:
-  // any.
+  // Whether it will soon be full, if those that bring in most go on: from 3/4 of the high marks on. Threads: any.
   bool isCrowded() const noexcept { return crowded_.load(std::memory_order_relaxed); }
   // How many more events may come until it is. A load. Threads: any.
   std::size_t roomUntilCrowded() const noexcept { return room_.load(std::memory_order_relaxed); }
