@@ -1,8 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// tarnreportingd: options, platform, service, serve. It owns no behaviour; what a part does is told where the part is.
-//
-// A signal ends the clients in order, with their sessions. The process then ends without tearing the parts down: what
-// the back-ends hold is committed, then it exits at once.
+// tarnreportingd: options, platform, service, serve; what a part does is told where the part is. A signal ends the
+// clients in order. The process then ends without tearing the parts down, once what the back-ends hold is committed.
 #include <csignal>
 #include <cstdint>
 #include <cstdlib>
@@ -35,7 +33,6 @@ namespace {
 
 using namespace linux_host;
 
-// One line for whoever started the service.
 int refuse(const std::string& complaint, std::int64_t exitStatus = kExitFailure) {
   std::cerr << "tarnreportingd: " << complaint << '\n';
   return static_cast<int>(exitStatus);
@@ -66,7 +63,6 @@ ServiceCounts countsOf(const TarnReportingService& service) {
   return counts;
 }
 
-// Serves until a signal; the exit status.
 int serve(LinuxPlatform& platform, HostSetup& setup) {
   if (const Status started = platform.start(); started.failed()) return refuse(started->text);
   std::shared_ptr<TarnReportingService> service;  // before any signal is served
@@ -75,9 +71,8 @@ int serve(LinuxPlatform& platform, HostSetup& setup) {
     service->announceEnd();
     platform.endClients([&service] { service->endSingleMessageSession(); });
   };
-  if (const Status heard = SignalSource::start(setup.signals, platform.loop(), heed); heard.failed()) {
-    return refuse(heard->text);
-  }
+  const Status heard = SignalSource::start(setup.signals, platform.loop(), heed);
+  if (heard.failed()) return refuse(heard->text);
   TarnReportingInstallFacilities(&platform.facilities());
   service = makeService(*setup.log);
   // Only now is there anything to connect to: who can reach the service finds it whole, its notifications heard.
