@@ -2,6 +2,8 @@
 #include "plist/EscapedText.h"
 
 #include <cstddef>
+#include <cstdint>
+#include <cstring>
 #include <optional>
 
 #include "plist/Characters.h"
@@ -68,6 +70,41 @@ bool isPlain(char character) {
   return character >= 0x20 && character < 0x7F;
 }
 
+bool needsJsonEscape(char character) {
+  return isControl(character) || character == '"' || character == '\\';
+}
+
+// The same of any of eight characters, in whatever order they lie in the word. A borrow only ever comes from a
+// character that needs an escape itself.
+bool anyNeedsJsonEscape(std::uint64_t eight) {
+  constexpr std::uint64_t kOnes = 0x0101010101010101;
+  constexpr std::uint64_t kHighest = 0x80 * kOnes;
+  const auto below = [](std::uint64_t characters, std::uint64_t limit) {
+    return (characters - limit * kOnes) & ~characters & kHighest;
+  };
+  return (below(eight, 0x20) | below(eight ^ '"' * kOnes, 1) | below(eight ^ '\\' * kOnes, 1)) != 0;
+}
+
+// Nearly all keys and most texts are, so they are looked at by words. The last one overlaps the one before.
+bool isPlainJson(std::string_view text) {
+  constexpr std::size_t kWord = sizeof(std::uint64_t);
+  const auto isPlainWord = [text](std::size_t at) {
+    std::uint64_t eight = 0;
+    std::memcpy(&eight, text.data() + at, kWord);
+    return !anyNeedsJsonEscape(eight);
+  };
+  if (text.size() < kWord) {
+    for (const char character : text) {
+      if (needsJsonEscape(character)) return false;
+    }
+    return true;
+  }
+  for (std::size_t at = 0; at + kWord < text.size(); at += kWord) {
+    if (!isPlainWord(at)) return false;
+  }
+  return isPlainWord(text.size() - kWord);
+}
+
 template <class NeedsEscape, class AppendEscape>
 void appendEscaped(std::string& out, std::string_view text, NeedsEscape needsEscape, AppendEscape appendEscape) {
   std::size_t begin = 0;
@@ -107,16 +144,18 @@ void appendPrintable(std::string& out, std::string_view text, LineEnds lineEnds)
 
 void appendJsonText(std::string& out, std::string_view text) {
   out += '"';
-  appendEscaped(
-      out, text, [](char character) { return isControl(character) || character == '"' || character == '\\'; },
-      [&](char character) {
-        if (isControl(character)) {
-          appendControl(out, character);
-        } else {
-          out += '\\';
-          out += character;
-        }
-      });
+  if (isPlainJson(text)) [[likely]] {
+    out += text;
+  } else {
+    appendEscaped(out, text, needsJsonEscape, [&](char character) {
+      if (isControl(character)) {
+        appendControl(out, character);
+      } else {
+        out += '\\';
+        out += character;
+      }
+    });
+  }
   out += '"';
 }
 

@@ -29,7 +29,7 @@ class RowHash {
     add(std::uint64_t{text.size()});
     std::size_t at = 0;
     for (; at + sizeof(std::uint64_t) <= text.size(); at += sizeof(std::uint64_t)) {
-      add(chunk(text.substr(at, sizeof(std::uint64_t))));
+      add(word(text.data() + at));
     }
     if (at < text.size()) {
       add(chunk(text.substr(at)));
@@ -39,6 +39,15 @@ class RowHash {
   std::uint64_t value() const noexcept { return state_; }
 
  private:
+  // Eight bytes; of a size that the compiler knows they are one load.
+  static std::uint64_t word(const char* bytes) noexcept {
+    if constexpr (std::endian::native == std::endian::little) {
+      std::uint64_t value = 0;
+      std::memcpy(&value, bytes, sizeof value);
+      return value;
+    }
+    return chunk({bytes, sizeof(std::uint64_t)});
+  }
   // Little-endian, as all machines read what one wrote.
   static std::uint64_t chunk(std::string_view bytes) noexcept {
     std::uint64_t value = 0;

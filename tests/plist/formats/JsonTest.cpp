@@ -4,6 +4,7 @@
 #include <gtest/gtest.h>
 
 #include <cmath>
+#include <string>
 
 #include "plist/Dictionary.h"
 
@@ -49,6 +50,25 @@ TEST(Json, DataIsBase64) {
 
 TEST(Json, TextsAreEscaped) {
   EXPECT_EQ(json("a\"b\\c\n\x01\x7f\xc3\xa9/"), "\"a\\\"b\\\\c\\n\\u0001\x7f\xc3\xa9/\"");
+}
+
+// Texts are looked at eight characters at a time, so each character is put at each place of short and long ones.
+TEST(Json, EachCharacterIsEscapedAtEachPlaceOfAText) {
+  for (std::size_t size = 1; size <= 26; ++size) {
+    for (std::size_t at = 0; at < size; ++at) {
+      for (int code = 0; code < 256; ++code) {
+        const char character = static_cast<char>(code);
+        const bool isEscaped = code < 0x20 || character == '"' || character == '\\';
+        const std::string before(at, '\xc3');
+        const std::string after(size - at - 1, '!');
+        const std::string written = json(before + character + after);
+        ASSERT_EQ(written.starts_with('"' + before + '\\'), isEscaped) << code << " at " << at << " of " << size;
+        if (!isEscaped) {
+          ASSERT_EQ(written, '"' + before + character + after + '"');
+        }
+      }
+    }
+  }
 }
 
 TEST(Json, ContainersKeepTheirOrder) {
