@@ -90,13 +90,15 @@ int SessionTable::beginRun(const RunFacts& run) {
   int code = run_ ? SQLITE_OK : findIds();
   if (code != SQLITE_OK) return code;
   Statement add;
-  code = add.prepare(connection_->handle(),
-                     "INSERT OR IGNORE INTO runs VALUES(?1, nullif(?2, ''), nullif(?3, ''), ?4, NULL, NULL)");
+  code = add.prepare(
+      connection_->handle(),
+      "INSERT OR IGNORE INTO runs VALUES(?1, nullif(?2, ''), nullif(?3, ''), ?4, NULL, NULL, nullif(?5, ''))");
   if (code == SQLITE_OK) {
     code = add.bind(1, *run_)
                .bind(2, std::string_view(run.boot))
                .bind(3, std::string_view(run.version))
                .bind(4, run.started)
+               .bind(5, std::string_view(run.machine))
                .run();
   }
   return code == SQLITE_OK ? closeOlder() : code;
@@ -135,6 +137,19 @@ int SessionTable::endRun(double time) {
   return code == SQLITE_OK ? end.bind(1, *run_).bind(2, time).run() : code;
 }
 
+// A statement that adds a row of so many columns.
+int SessionTable::prepareToCarry(Connection& into, const char* table, Statement& write, int& columns) {
+  Statement all;
+  int code = all.prepare(into.handle(), std::string("SELECT * FROM ") + table);
+  if (code != SQLITE_OK) return code;
+  columns = sqlite3_column_count(all.handle());
+  std::string places = "?1";
+  for (int column = 1; column < columns; ++column) {
+    places += ", ?" + std::to_string(column + 1);
+  }
+  return write.prepare(into.handle(), std::string("INSERT OR IGNORE INTO ") + table + " VALUES(" + places + ")");
+}
+
 // Rows after one that can't be read are looked for from the end.
 int SessionTable::carry(Connection& from, Connection& into) {
   constexpr const char* kCarried[] = {"runs", "sessions", "periods", "session_ages"};
@@ -143,15 +158,12 @@ int SessionTable::carry(Connection& from, Connection& into) {
     for (const char* const order : {"", " ORDER BY 1 DESC"}) {
       Statement read;
       if (read.prepare(from.handle(), std::string("SELECT * FROM ") + table + order) != SQLITE_OK) break;
-      const int columns = sqlite3_column_count(read.handle());
-      std::string places = "?1";
-      for (int column = 1; column < columns; ++column) {
-        places += ", ?" + std::to_string(column + 1);
-      }
       Statement write;
-      int code =
-          write.prepare(into.handle(), std::string("INSERT OR IGNORE INTO ") + table + " VALUES(" + places + ")");
+      int columns = 0;
+      int code = prepareToCarry(into, table, write, columns);
       if (code != SQLITE_OK) return code;
+      // Of an older layout, which had fewer: the others stay null.
+      columns = std::min(columns, sqlite3_column_count(read.handle()));
       int found = read.step();
       for (; found == SQLITE_ROW; found = read.step()) {
         for (int column = 0; column < columns; ++column) {

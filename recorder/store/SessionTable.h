@@ -2,7 +2,7 @@
 // SessionTable: runs, sessions and their periods as rows of the recorder's file, written within the transactions of the
 // events, in order with them.
 //
-//   runs(id, boot, version, started, ended, end_reason)                  one row a run of the service
+//   runs(id, boot, version, started, ended, end_reason, machine)         one row a run of the service
 //   sessions(id, run, ..., created, ended, end_reason)                   id: what the file gave before + the number
 //   periods(id, session, started, stopped, messages, redundant, first_event, last_event)
 //
@@ -41,7 +41,8 @@ struct SessionNote {
 struct RunFacts {
   std::string boot;
   std::string version;
-  double started = 0;  // epoch seconds
+  double started = 0;   // epoch seconds
+  std::string machine;  // a JSON object
 };
 
 class SessionTable {
@@ -91,6 +92,7 @@ class SessionTable {
 
   [[nodiscard]] int addEvent(platform::SessionNumber session, std::int64_t event);
   [[nodiscard]] int findIds();
+  [[nodiscard]] static int prepareToCarry(Connection& into, const char* table, Statement& write, int& columns);
   [[nodiscard]] int closeOlder();
   [[nodiscard]] int describe(const SessionNote& note);
   [[nodiscard]] int start(const SessionNote& note);

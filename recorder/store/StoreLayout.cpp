@@ -3,10 +3,13 @@
 
 #include <sqlite3.h>
 
+#include <algorithm>
 #include <charconv>
+#include <iterator>
 #include <span>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "recorder/store/StoreViews.h"
 #include "recorder/store/rows/Statement.h"
@@ -44,7 +47,8 @@ constexpr Made kTables[] = {
      "CREATE TABLE session_spans(session INTEGER, first INTEGER, PRIMARY KEY(session, first)) WITHOUT ROWID"},
     {"session_ages", "CREATE TABLE session_ages(first INTEGER PRIMARY KEY, seconds REAL)"},
     {"runs",
-     "CREATE TABLE runs(id INTEGER PRIMARY KEY, boot TEXT, version TEXT, started REAL, ended REAL, end_reason TEXT)"},
+     "CREATE TABLE runs(id INTEGER PRIMARY KEY, boot TEXT, version TEXT, started REAL, ended REAL, end_reason TEXT, "
+     "machine TEXT)"},
     {"sessions",
      "CREATE TABLE sessions(id INTEGER PRIMARY KEY, run INTEGER, reporter INTEGER, connection INTEGER, pid INTEGER, "
      "uid INTEGER, process TEXT, application TEXT, service_type INTEGER, service_name TEXT, created REAL, ended REAL, "
@@ -54,6 +58,13 @@ constexpr Made kTables[] = {
      "redundant INTEGER, first_event INTEGER, last_event INTEGER)"},
     {"periods_of_session", "CREATE INDEX periods_of_session ON periods(session)"},
 };
+
+// What version 1 had in the place of a table of these, and what brings it over: SQLite puts a new column at the end of
+// the table's text.
+constexpr Made kRunsOfVersion1 = {
+    "runs",
+    "CREATE TABLE runs(id INTEGER PRIMARY KEY, boot TEXT, version TEXT, started REAL, ended REAL, end_reason TEXT)"};
+constexpr const char* kBringOverVersion1 = "ALTER TABLE runs ADD COLUMN machine TEXT; PRAGMA user_version = 2;";
 
 // The recorder's own notes beside the events, as in the first version. After "holds_after" every id is there, or noted
 // as lost; whoever reads along learns from "begun_after" where the ids of a fresh file go on.
@@ -141,8 +152,14 @@ Status checkAll(Connection& connection, std::span<const Made> all) {
   return connection.errorOf(code);
 }
 
-Status checkCurrentTables(Connection& connection) {
-  Status error = checkAll(connection, kTables);
+// Of a version with sessions.
+Status checkTablesOf(std::int64_t version, Connection& connection) {
+  std::vector<Made> tables(std::begin(kTables), std::end(kTables));
+  if (version == 1) {
+    *std::find_if(tables.begin(), tables.end(), [](const Made& made) { return made.name == kRunsOfVersion1.name; }) =
+        kRunsOfVersion1;
+  }
+  Status error = checkAll(connection, tables);
   return error.ok() ? checkAll(connection, kNotes) : error;
 }
 
@@ -220,8 +237,8 @@ std::string currentViews() {
 Status checkSchema(Connection& connection) {
   const Result<std::int64_t> version = readVersion(connection);
   if (version.failed()) return version.error;
-  if (version.value == kLayoutVersion) {
-    Status error = checkCurrentTables(connection);
+  if (version.value >= kFirstVersionWithSessions) {
+    Status error = checkTablesOf(version.value, connection);
     return error.ok() ? checkAll(connection, storeViews()) : error;
   }
   if (Status error = checkOlderTables(connection); error.failed()) return error;
@@ -235,9 +252,10 @@ Status checkSchema(Connection& connection) {
 Status checkTables(Connection& connection, std::int64_t lastId, Tables& found) {
   const Result<std::int64_t> version = readVersion(connection);
   if (version.failed()) return version.error;
-  if (version.value == kLayoutVersion) {
+  if (version.value >= kFirstVersionWithSessions) {
     found = Tables::Current;
-    Status error = checkCurrentTables(connection);
+    Status error = checkTablesOf(version.value, connection);
+    error = error.ok() && version.value == 1 ? makeAtOnce(connection, kBringOverVersion1) : error;
     return error.ok() ? keepViews(connection) : error;
   }
   const Result<std::int64_t> ours = connection.readInteger(

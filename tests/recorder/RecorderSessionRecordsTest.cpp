@@ -32,6 +32,7 @@ class RecorderSessionRecordsTest : public RecorderFixture {
     options_.sessionOf = current;
     options_.boot = "boot";
     options_.version = "1.2.3";
+    options_.machine = R"({"os":"Testix"})";
     clock_.setEpochSeconds(kNow);
   }
   ~RecorderSessionRecordsTest() override { worksFor = 0; }
@@ -227,7 +228,8 @@ TEST_F(RecorderSessionRecordsTest, ARunThatEndsWellSaysSo) {
   begin();
   waitSeconds(100);
   end();
-  EXPECT_EQ(ask(file(), "SELECT * FROM runs"), Rows{"1|boot|1.2.3|1750000000.0|1750000100.0|stopped"});
+  EXPECT_EQ(ask(file(), "SELECT * FROM runs"),
+            Rows{"1|boot|1.2.3|1750000000.0|1750000100.0|stopped|{\"os\":\"Testix\"}"});
 }
 
 TEST_F(RecorderSessionRecordsTest, WhatACrashLeavesOpenIsClosedByTheNextRun) {
