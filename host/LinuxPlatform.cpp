@@ -15,10 +15,12 @@
 #include "host/log/PrefixedLog.h"
 #include "host/loop/Settling.h"
 #include "host/loop/WorkOwner.h"
+#include "host/settings/MachineFacts.h"
 #include "host/system/DescriptorLimit.h"
 #include "host/system/Files.h"
 #include "host/system/MemoryReserve.h"
 #include "host/system/SystemError.h"
+#include "plist/formats/Json.h"
 
 namespace tarn::linux_host {
 
@@ -47,7 +49,7 @@ HostLimits withinTheSystem(HostLimits limits) {
 
 // Under the recorder's cap stands all that the service writes without end.
 recorder::RecorderOptions recorderOptions(const HostConfiguration& configuration, const std::string& stateDirectory,
-                                          const OverflowFile& overflow) {
+                                          const JsonDeviceProperties& device, const OverflowFile& overflow) {
   recorder::RecorderOptions options = configuration.recorder;
   options.file = stateDirectory + "/recorder.sqlite3";
   const std::string logs = configuration.paths.diagnosticLogs.value_or(stateDirectory) + "/DiagnosticLogs/Audio/";
@@ -55,6 +57,7 @@ recorder::RecorderOptions recorderOptions(const HostConfiguration& configuration
   options.others = overflow.size();
   options.sessionOf = &WorkOwner::current;
   options.version = TARN_VERSION;
+  plist::appendJson(options.machine, device.over(readMachineFacts()));
   return options;
 }
 
@@ -109,7 +112,7 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
       connections_(loop_, log_, withinTheSystem(configuration.limits)),
       overflow_(stateDirectory, configuration.limits.logs, overflowShare(configuration.recorder)),
       recorderEnabled_(configuration.recorderEnabled),
-      recorder_(recorderOptions(configuration, stateDirectory, overflow_), log_, clock_),
+      recorder_(recorderOptions(configuration, stateDirectory, deviceProperties, overflow_), log_, clock_),
       workQueues_(clock_, loop_.queue(), configuration.limits.poolWork),
       tally_(recorder_, clock_, configuration.tally.inUse),
       wattlog_(recorder_, clock_),

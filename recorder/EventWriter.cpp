@@ -75,8 +75,8 @@ Status EventWriter::openOnce() {
     if (auto error = carryOver(); error.failed()) return error;
   }
   if (file_.hasBegunRun()) return {};
-  return file_.beginRun(
-      {options_.boot.empty() ? RecorderTime::currentBoot() : options_.boot, options_.version, started_});
+  return file_.beginRun({options_.boot.empty() ? RecorderTime::currentBoot() : options_.boot, options_.version,
+                         started_, options_.machine});
 }
 
 // A run whose end can't be noted counts as one that was killed.

@@ -83,6 +83,8 @@ struct RecorderOptions {
   std::string boot;
   // Of the service, for the row of its run.
   std::string version;
+  // What the machine is, a JSON object, likewise.
+  std::string machine;
   // For which session the calling thread works, 0 for none; asked with every event. Null: for none.
   std::int64_t (*sessionOf)() noexcept = nullptr;
 

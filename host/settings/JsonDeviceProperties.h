@@ -2,7 +2,9 @@
 // JsonDeviceProperties: what the device is, from a file that holds one JSON object of properties:
 // {"InternalBuild": false, "haptics": false}. Without a file the device has neither property.
 //
-// A property that the system knows must be true or false; others are taken as they are, for newer systems. Owned by the
+// Texts under the names of the machine's facts (host/settings/MachineFacts.h) take the place of what the machine says
+// of itself. A property that the system knows must be true or false, or a text; others are taken as they are, for newer
+// systems. Owned by the
 // platform and loaded at the start: a device doesn't change while it runs. Threads: any; it never changes once load()
 // is over.
 #pragma once
@@ -29,6 +31,9 @@ class JsonDeviceProperties final : public platform::DeviceProperties {
 
   // Nothing for a property that the file doesn't have, and for one that is no boolean.
   std::optional<bool> boolean(std::string_view name) const override;
+
+  // The machine's facts with what the file says of them in their place.
+  plist::Dictionary over(plist::Dictionary machineFacts) const;
 
  private:
   plist::Dictionary properties_;

@@ -30,7 +30,7 @@ class SessionSums {
   };
   enum Place : std::size_t { Runs, Sessions, Periods, Redundant };
   static constexpr std::array<Table, 4> kTables{{
-      {"runs", "id, boot, version, started, ended, end_reason"},
+      {"runs", "id, boot, version, started, ended, end_reason, machine"},
       {"sessions",
        "id, run, reporter, connection, pid, uid, process, application, service_type, service_name, created, ended, "
        "end_reason"},

@@ -101,10 +101,15 @@ int SessionTable::beginRun(const RunFacts& run) {
   int code = run_ ? SQLITE_OK : findIds();
   if (code != SQLITE_OK) return code;
   Statement add;
-  code = add.prepare(connection_->handle(),
-                     "INSERT OR IGNORE INTO runs VALUES(?1, nullif(?2, ''), nullif(?3, ''), ?4, NULL, NULL)");
+  code = add.prepare(
+      connection_->handle(),
+      "INSERT OR IGNORE INTO runs VALUES(?1, nullif(?2, ''), nullif(?3, ''), ?4, NULL, NULL, nullif(?5, ''))");
   if (code == SQLITE_OK) {
-    add.bind(1, *run_).bind(2, std::string_view(run.boot)).bind(3, std::string_view(run.version)).bind(4, run.started);
+    add.bind(1, *run_)
+        .bind(2, std::string_view(run.boot))
+        .bind(3, std::string_view(run.version))
+        .bind(4, run.started)
+        .bind(5, std::string_view(run.machine));
     code = sums_.change(SessionSums::Runs, *run_, add);
   }
   return code == SQLITE_OK ? closeOlder() : code;
@@ -175,7 +180,12 @@ std::string readingOf(Connection& from, std::size_t place) {
                                               " <> (SELECT hash FROM row_hashes WHERE row_hashes.id = 4 * t.id + " +
                                               std::to_string(place) + ")"
                                         : std::string("0");
-  return "SELECT " + isDamaged + ", " + std::string(table.columns) + " FROM " + std::string(table.name) + " AS t";
+  std::string columns(table.columns);
+  const bool knowsMachine = from.integer("SELECT count(*) FROM pragma_table_info('runs') WHERE name = 'machine'") == 1;
+  if (place == SessionSums::Runs && !knowsMachine) {
+    columns.replace(columns.find("machine"), std::string_view("machine").size(), "NULL");
+  }
+  return "SELECT " + isDamaged + ", " + columns + " FROM " + std::string(table.name) + " AS t";
 }
 
 }  // namespace

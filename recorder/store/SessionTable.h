@@ -2,7 +2,7 @@
 // SessionTable: runs, sessions and their periods as rows of the recorder's file, written within the transactions of the
 // events, in order with them.
 //
-//   runs(id, boot, version, started, ended, end_reason)                  one row a run of the service
+//   runs(id, boot, version, started, ended, end_reason, machine)         one row a run of the service
 //   sessions(id, run, ..., created, ended, end_reason)                   id: what the file gave before + the number
 //   periods(id, session, started, stopped, messages, redundant, first_event, last_event)
 //   redundant_messages(id, session, period, time, stamp, event, after_event)
@@ -44,7 +44,8 @@ struct SessionNote {
 struct RunFacts {
   std::string boot;
   std::string version;
-  double started = 0;  // epoch seconds
+  double started = 0;   // epoch seconds
+  std::string machine;  // a JSON object
 };
 
 class SessionTable {

@@ -3,10 +3,13 @@
 
 #include <sqlite3.h>
 
+#include <algorithm>
 #include <charconv>
+#include <iterator>
 #include <span>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "recorder/store/SessionSums.h"
 #include "recorder/store/StoreViews.h"
@@ -45,7 +48,8 @@ constexpr Made kTables[] = {
      "CREATE TABLE session_spans(session INTEGER, first INTEGER, PRIMARY KEY(session, first)) WITHOUT ROWID"},
     {"session_ages", "CREATE TABLE session_ages(first INTEGER PRIMARY KEY, seconds REAL)"},
     {"runs",
-     "CREATE TABLE runs(id INTEGER PRIMARY KEY, boot TEXT, version TEXT, started REAL, ended REAL, end_reason TEXT)"},
+     "CREATE TABLE runs(id INTEGER PRIMARY KEY, boot TEXT, version TEXT, started REAL, ended REAL, end_reason TEXT, "
+     "machine TEXT)"},
     {"sessions",
      "CREATE TABLE sessions(id INTEGER PRIMARY KEY, run INTEGER, reporter INTEGER, connection INTEGER, pid INTEGER, "
      "uid INTEGER, process TEXT, application TEXT, service_type INTEGER, service_name TEXT, created REAL, ended REAL, "
@@ -54,17 +58,18 @@ constexpr Made kTables[] = {
      "CREATE TABLE periods(id INTEGER PRIMARY KEY, session INTEGER, started REAL, stopped REAL, messages INTEGER, "
      "redundant INTEGER, first_event INTEGER, last_event INTEGER)"},
     {"periods_of_session", "CREATE INDEX periods_of_session ON periods(session)"},
-};
-
-// These came after the first files of this version, which lack them until they are opened to be written to. Nothing is
-// moved for that, so the version stays; a program that doesn't know them loses nothing but what they hold.
-constexpr Made kLaterTables[] = {
     {"redundant_messages",
      "CREATE TABLE redundant_messages(id INTEGER PRIMARY KEY, session INTEGER, period INTEGER, time REAL, stamp REAL, "
      "event INTEGER, after_event INTEGER)"},
     {"redundant_of_session", "CREATE INDEX redundant_of_session ON redundant_messages(session)"},
     {"row_hashes", "CREATE TABLE row_hashes(id INTEGER PRIMARY KEY, hash INTEGER)"},
 };
+// How many of them version 1 had not.
+constexpr std::size_t kNewInVersion2 = 3;
+// What it had in the place of one; SQLite puts a new column at the end of the table's text.
+constexpr Made kRunsOfVersion1 = {
+    "runs",
+    "CREATE TABLE runs(id INTEGER PRIMARY KEY, boot TEXT, version TEXT, started REAL, ended REAL, end_reason TEXT)"};
 
 // The recorder's own notes beside the events, as in the first version. After "holds_after" every id is there, or noted
 // as lost; whoever reads along learns from "begun_after" where the ids of a fresh file go on.
@@ -156,28 +161,28 @@ Status checkAll(Connection& connection, std::span<const Made> all, std::string* 
   return connection.errorOf(code);
 }
 
-// `missing`: what makes those that a file of this version may lack.
-Status checkCurrentTables(Connection& connection, std::string& missing) {
-  Status error = checkAll(connection, kTables);
-  error = error.ok() ? checkAll(connection, kNotes) : error;
-  return error.ok() ? checkAll(connection, kLaterTables, &missing) : error;
+// Of a version with sessions. `missing`: what makes those that a file of version 1 lacks.
+Status checkTablesOf(std::int64_t version, Connection& connection, std::string& missing) {
+  std::vector<Made> tables(std::begin(kTables), std::end(kTables));
+  std::span<const Made> later;
+  if (version == 1) {
+    *std::find_if(tables.begin(), tables.end(), [](const Made& made) { return made.name == kRunsOfVersion1.name; }) =
+        kRunsOfVersion1;
+    later = std::span(kTables).last(kNewInVersion2);
+    tables.resize(tables.size() - kNewInVersion2);
+  }
+  Status error = checkAll(connection, tables);
+  error = error.ok() ? checkAll(connection, later, &missing) : error;
+  return error.ok() ? checkAll(connection, kNotes) : error;
 }
 
-Status completeTables(Connection& connection) {
-  std::string missing;
-  const Status error = checkCurrentTables(connection, missing);
-  if (error.failed()) return error;
-  if (!missing.empty()) {
-    // What rows without a checksum say now is all that is known of them.
-    if (Status made = makeAtOnce(connection, missing + SessionSums::sealAll()); made.failed()) return made;
-  }
-  // Spans began with any event once, and could lie across each other.
-  const Result<std::int64_t> others =
-      connection.readInteger("SELECT EXISTS (SELECT 1 FROM session_spans WHERE first & 255 <> 0)");
-  if (others.failed() || others.value == 0) return others.error;
+// Spans began with any event once, and could lie across each other. What rows without a checksum say now is all that is
+// known of them.
+Status bringOverVersion1(Connection& connection, const std::string& missing) {
   return makeAtOnce(connection,
-                    "DELETE FROM session_spans; INSERT INTO session_spans SELECT DISTINCT session, id & -256 FROM "
-                    "event_rows WHERE session IS NOT NULL;");
+                    "ALTER TABLE runs ADD COLUMN machine TEXT;" + missing + SessionSums::sealAll() +
+                        "DELETE FROM session_spans; INSERT INTO session_spans SELECT DISTINCT session, id & -256 FROM "
+                        "event_rows WHERE session IS NOT NULL; PRAGMA user_version = 2;");
 }
 
 // What is right needs no transaction.
@@ -241,7 +246,7 @@ Status checkPages(Connection& connection, bool indexes) {
 }
 
 std::string currentTables() {
-  return makeAll(kTables) + makeAll(kLaterTables) + "PRAGMA user_version = " + std::to_string(kLayoutVersion) + ";";
+  return makeAll(kTables) + "PRAGMA user_version = " + std::to_string(kLayoutVersion) + ";";
 }
 
 std::string currentViews() {
@@ -255,9 +260,9 @@ std::string currentViews() {
 Status checkSchema(Connection& connection) {
   const Result<std::int64_t> version = readVersion(connection);
   if (version.failed()) return version.error;
-  if (version.value == kLayoutVersion) {
+  if (version.value >= kFirstVersionWithSessions) {
     std::string missing;
-    Status error = checkCurrentTables(connection, missing);
+    Status error = checkTablesOf(version.value, connection, missing);
     return error.ok() ? checkAll(connection, storeViews()) : error;
   }
   if (Status error = checkOlderTables(connection); error.failed()) return error;
@@ -271,9 +276,11 @@ Status checkSchema(Connection& connection) {
 Status checkTables(Connection& connection, std::int64_t lastId, Tables& found) {
   const Result<std::int64_t> version = readVersion(connection);
   if (version.failed()) return version.error;
-  if (version.value == kLayoutVersion) {
+  if (version.value >= kFirstVersionWithSessions) {
     found = Tables::Current;
-    Status error = completeTables(connection);
+    std::string missing;
+    Status error = checkTablesOf(version.value, connection, missing);
+    error = error.ok() && version.value == 1 ? bringOverVersion1(connection, missing) : error;
     return error.ok() ? keepViews(connection) : error;
   }
   const Result<std::int64_t> ours = connection.readInteger(

@@ -3,8 +3,8 @@
 // that a recorder makes. Each answers nothing, or what is wrong under SQLite's code for it. Threads: the connection's.
 //
 // `PRAGMA user_version` is the version of the layout. In version 0 `events` was the table, without sessions; from 1 on
-// it is a view, and docs/recorded.md tells what stands where. An older file is migrated when it is opened (see
-// StoreMigration); it is read as it is by whoever only reads.
+// it is a view, and docs/recorded.md tells what stands where; version 2 tells what machine a run was on. An older file
+// is migrated when it is opened (see StoreMigration); it is read as it is by whoever only reads.
 #pragma once
 
 #include <cstdint>
@@ -16,7 +16,8 @@
 
 namespace tarn::recorder {
 
-constexpr std::int64_t kLayoutVersion = 1;
+constexpr std::int64_t kLayoutVersion = 2;
+constexpr std::int64_t kFirstVersionWithSessions = 1;
 
 // What was found when the tables were looked at.
 enum class Tables {

@@ -221,6 +221,17 @@ TEST_F(SessionCommandsTest, ShowTellsItOnOneScreen) {
             "  and 3 more (--json has all)\n");
 }
 
+TEST_F(SessionCommandsTest, ShowTellsTheMachineWhereTheRunSaysWhichItWas) {
+  makeTwo();
+  EXPECT_EQ(json::parse(ctl("show 12 --json").output).at("run").at("machine"), json::object());
+  sql(R"(ALTER TABLE runs ADD COLUMN machine TEXT; UPDATE runs SET machine = '{"model":"Player 3","os_id":"debian"}';)");
+  EXPECT_NE(ctl("show 12").output.find("\n  machine      model Player 3, os_id debian\n"), std::string::npos);
+  EXPECT_EQ(json::parse(ctl("show 12 --json").output).at("run").at("machine"),
+            json::parse(R"({"model":"Player 3","os_id":"debian"})"));
+  sql("UPDATE runs SET machine = '{\"model';");
+  EXPECT_EQ(json::parse(ctl("show 12 --json").output).at("run").at("machine"), json::object());
+}
+
 TEST_F(SessionCommandsTest, ShowAsJsonHasAllOfIt) {
   makeTwo();
   const json shown = json::parse(ctl("show 12 --json").output);

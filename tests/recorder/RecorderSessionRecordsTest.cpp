@@ -187,7 +187,8 @@ TEST_F(RecorderSessionRecordsTest, ARunThatEndsWellSaysSo) {
   begin();
   waitSeconds(100);
   end();
-  EXPECT_EQ(ask(file(), "SELECT * FROM runs"), Rows{"1|boot|1.2.3|1750000000.0|1750000100.0|stopped"});
+  EXPECT_EQ(ask(file(), "SELECT * FROM runs"),
+            Rows{"1|boot|1.2.3|1750000000.0|1750000100.0|stopped|{\"os\":\"Testix\"}"});
 }
 
 TEST_F(RecorderSessionRecordsTest, WhatACrashLeavesOpenIsClosedByTheNextRun) {

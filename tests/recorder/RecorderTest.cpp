@@ -21,12 +21,12 @@ TEST_F(RecorderTest, ColumnsAreExactlyTheAgreedOnes) {
     return askOne(file(), "SELECT group_concat(name) FROM pragma_table_info('" + table + "')");
   };
   EXPECT_EQ(columnsOf("events"), "id,time,backend,name,payload,detail,session");
-  EXPECT_EQ(columnsOf("runs"), "id,boot,version,started,ended,end_reason");
+  EXPECT_EQ(columnsOf("runs"), "id,boot,version,started,ended,end_reason,machine");
   EXPECT_EQ(
       columnsOf("sessions"),
       "id,run,reporter,connection,pid,uid,process,application,service_type,service_name,created,ended,end_reason");
   EXPECT_EQ(columnsOf("periods"), "id,session,started,stopped,messages,redundant,first_event,last_event");
-  EXPECT_EQ(askOne(file(), "PRAGMA user_version"), "1");
+  EXPECT_EQ(askOne(file(), "PRAGMA user_version"), "2");
 }
 
 TEST_F(RecorderTest, FileIsInWriteAheadMode) {

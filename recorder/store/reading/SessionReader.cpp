@@ -114,13 +114,22 @@ Result<std::optional<SessionRow>> SessionReader::session(std::int64_t id) {
 }
 
 Result<std::optional<RunRow>> SessionReader::run(std::int64_t id) {
+  bool hasMachine = false;  // not in version 1
   Result<std::optional<RunRow>> found;
   found.error = answer(
-      "SELECT id, boot, version, started, ended, end_reason FROM runs WHERE id = ?1",
+      "SELECT 1 FROM pragma_table_info('runs') WHERE name = 'machine'", [](Statement&) {},
+      [&](const Statement&) {
+        hasMachine = true;
+        return false;
+      });
+  if (found.failed()) return found;
+  found.error = answer(
+      std::string("SELECT id, boot, version, started, ended, end_reason, ") + (hasMachine ? "machine" : "NULL") +
+          " FROM runs WHERE id = ?1",
       [id](Statement& statement) { statement.bind(1, id); },
       [&](const Statement& row) {
-        found.value = RunRow{row.integer(0), std::string(row.text(1)), std::string(row.text(2)),
-                             row.real(3),    realOf(row, 4),           std::string(row.text(5))};
+        found.value = RunRow{row.integer(0), std::string(row.text(1)), std::string(row.text(2)), row.real(3),
+                             realOf(row, 4), std::string(row.text(5)), std::string(row.text(6))};
         return false;
       });
   return found;

@@ -38,6 +38,7 @@ struct RunRow {
   double started = 0;
   std::optional<double> ended;
   std::string endReason;
+  std::string machine;  // a JSON object; empty: the run was before that was noted
 };
 
 struct SessionRow {

@@ -49,8 +49,6 @@ Error refusalOf(const std::filesystem::path& file);
 [[nodiscard]] Status openToRead(Connection& connection, const std::filesystem::path& file, ReadBounds& bounds,
                                 bool& asItLies);
 
-// The first version of the layout (PRAGMA user_version) that has sessions.
-inline constexpr std::int64_t kFirstVersionWithSessions = 1;
 // That the file is of the version before there were sessions.
 Error noSessionsIn(const std::filesystem::path& file);
 // Whether the file has sessions that this program can read: nothing, or one line that names the file and its version.

@@ -274,12 +274,23 @@ TEST(JsonDeviceProperties, FileTellsWhatTheDeviceIsAndNothingElseIsKnown) {
   EXPECT_FALSE(properties.boolean("newer"));
 }
 
+TEST(JsonDeviceProperties, WhatTheFileSaysOfTheMachineGoesBeforeWhatTheMachineSays) {
+  const TemporaryFolder folder;
+  folder.write("p.json", R"({"haptics": true, "model": "Player 3", "chassis": "embedded", "shop": "Berlin"})");
+  JsonDeviceProperties properties;
+  ASSERT_EQ(properties.load(folder.path("p.json")).text(), "");
+  EXPECT_EQ(properties.over({{"vendor", "ACME"}, {"model", "Board"}}),
+            (plist::Dictionary{{"vendor", "ACME"}, {"model", "Player 3"}, {"chassis", "embedded"}}));
+}
+
 TEST(JsonDeviceProperties, WrongFilesAreToldWithTheirPlaceAndChangeNothing) {
   const TemporaryFolder folder;
   const std::string path = folder.path("p.json");
   JsonDeviceProperties properties;
   folder.write("p.json", "{\n\"newer\": 1,\n\"haptics\": 1}");
   EXPECT_EQ(properties.load(path).text(), path + ":3: \"haptics\" must be true or false");
+  folder.write("p.json", "{\"model\": 3}");
+  EXPECT_EQ(properties.load(path).text(), path + ":1: \"model\" must be a text");
   folder.write("p.json", "{\n\"haptics\": yes}");
   EXPECT_EQ(properties.load(path).text().substr(0, path.size() + 6), path + ":2:12:");
   folder.write("p.json", "[]");

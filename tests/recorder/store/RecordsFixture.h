@@ -21,6 +21,7 @@ class RecordsFixture : public RecorderFixture {
     options_.sessionOf = current;
     options_.boot = "boot";
     options_.version = "1.2.3";
+    options_.machine = R"({"os":"Testix"})";
     clock_.setEpochSeconds(kNow);
   }
   ~RecordsFixture() override { worksFor_ = 0; }

@@ -186,8 +186,8 @@ TEST_F(SessionReaderOpenTest, AStoreOfTheFirstVersionSaysThatItHasNoSessionsYet)
 
 TEST_F(SessionReaderOpenTest, ANewerStoreIsRefused) {
   makeStore();
-  sql("PRAGMA user_version = 2;");
-  EXPECT_EQ(faultOfOpening(), file().string() + " is of version 2, which is newer than this program: it reads up to 1");
+  sql("PRAGMA user_version = 3;");
+  EXPECT_EQ(faultOfOpening(), file().string() + " is of version 3, which is newer than this program: it reads up to 2");
 }
 
 TEST_F(SessionReaderOpenTest, AFileThatMayNotBeReadIsSaidToRefuse) {

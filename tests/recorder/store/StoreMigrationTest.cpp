@@ -49,7 +49,7 @@ TEST_F(StoreMigration, AStoreOfVersion0KeepsItsEventsAndTheirChecksums) {
   open();
   EXPECT_EQ(errors(), 0U);
   EXPECT_TRUE(log_.contains("had the layout of an older service; its 128 events have the present one now"));
-  EXPECT_EQ(askOne(file(), "PRAGMA user_version"), "1");
+  EXPECT_EQ(askOne(file(), "PRAGMA user_version"), "2");
   EXPECT_EQ(ask(file(), kAll), before_);
   EXPECT_EQ(askOne(file(), "SELECT count(session) FROM events"), "0");
   const auto report = inspectStore(file());
@@ -149,7 +149,7 @@ TEST_F(StoreMigration, AKillLeavesTheOldFileOrTheNewOne) {
       ASSERT_EQ(ask(file(), kAll), before_);
       ASSERT_EQ(askOne(file(), "PRAGMA quick_check"), "ok");
       open();
-      ASSERT_EQ(askOne(file(), "PRAGMA user_version"), "1");
+      ASSERT_EQ(askOne(file(), "PRAGMA user_version"), "2");
       ASSERT_EQ(ask(file(), kAll), before_);
     }
   }
@@ -162,18 +162,44 @@ TEST_F(StoreMigration, ItDoesNotNeedMuchMoreRoom) {
   EXPECT_LT(std::filesystem::file_size(file()), before * 5 / 4);
 }
 
+TEST_F(StoreMigration, AStoreOfVersion1GetsTheMachinesOfItsRuns) {
+  options_.machine = R"({"model":"Player 3"})";
+  start();
+  record("before");
+  ASSERT_TRUE(flush());
+  stop();
+  change(file(), "ALTER TABLE runs DROP COLUMN machine; PRAGMA user_version = 1");
+  const Rows before = ask(file(), kAll);
+  EXPECT_TRUE(inspectStore(file()).ok());
+  open();
+  EXPECT_EQ(errors(), 0U);
+  EXPECT_EQ(askOne(file(), "PRAGMA user_version"), "2");
+  EXPECT_EQ(ask(file(), "SELECT id, machine FROM runs"), (Rows{"1|NULL", "2|{\"model\":\"Player 3\"}"}));
+  EXPECT_EQ(ask(file(), kAll), before);
+  EXPECT_TRUE(filesSetAside().empty());
+}
+
+TEST_F(StoreMigration, TablesOfOthersUnderVersion1AreNotChanged) {
+  change(file(),
+         "PRAGMA journal_mode = WAL; CREATE TABLE runs(id INTEGER PRIMARY KEY, miles REAL);"
+         "PRAGMA user_version = 1");
+  open();
+  ASSERT_EQ(filesSetAside().size(), 1U);
+  EXPECT_EQ(askOne(filesSetAside().front(), "SELECT count(*) FROM pragma_table_info('runs')"), "2");
+}
+
 TEST_F(StoreMigration, ANewerLayoutIsRefusedAndLeftAlone) {
   open();
-  change(file(), "PRAGMA user_version = 2");
+  change(file(), "PRAGMA user_version = 3");
   log_.clear();
   start();
   record("waits");
   ASSERT_TRUE(eventually([&] { return errors() == 1; }));
   EXPECT_TRUE(log_.contains(platform::LogLevel::Error,
-                            "its layout is version 2, of a newer service; this one knows those up to 1"));
+                            "its layout is version 3, of a newer service; this one knows those up to 2"));
   EXPECT_FALSE(recorder_->flush(std::chrono::milliseconds(100)));
   EXPECT_TRUE(filesSetAside().empty());
-  EXPECT_EQ(askOne(file(), "PRAGMA user_version"), "2");
+  EXPECT_EQ(askOne(file(), "PRAGMA user_version"), "3");
   EXPECT_TRUE(inspectStore(file()).failed());
   EXPECT_EQ(EventReader(file()).read({}).error.text(), file().string() + ": its layout is that of a newer service");
 }

@@ -4,6 +4,8 @@
 #include <cstdio>
 #include <map>
 
+#include "host/system/JsonValues.h"
+#include "plist/formats/Json.h"
 #include "tools/ctl/sessions/JsonObject.h"
 #include "tools/ctl/sessions/SessionStory.h"
 #include "tools/ctl/terminal/TextTable.h"
@@ -71,6 +73,12 @@ class StoryPrinter {
   const Terminal& terminal_;
 };
 
+// Empty where the recorder didn't note it, and where the file has something else there.
+plist::Dictionary machineOf(const recorder::RunRow& run) {
+  const linux_host::JsonReading reading = linux_host::readJson(run.machine);
+  return reading.fault ? plist::Dictionary() : reading.value.view().dictionary();
+}
+
 std::string orUnknown(const std::string& text) {
   return text.empty() ? "unknown" : text;
 }
@@ -100,6 +108,13 @@ void StoryPrinter::printHead() {
   if (story_.run) {
     row("run", std::to_string(story_.run->id) + " of the service " + story_.run->version + ", from " +
                    time(story_.run->started));
+    std::string machine;
+    for (const auto& entry : machineOf(*story_.run)) {
+      machine += (machine.empty() ? "" : ", ") + std::string(entry.key.text()) + " " + entry.value.asText();
+    }
+    if (!machine.empty()) {
+      row("machine", machine);
+    }
   }
 }
 
@@ -187,8 +202,11 @@ void StoryPrinter::printBackends() {
 
 std::string runJson(const recorder::RunRow& run) {
   JsonObject object;
+  std::string machine;
+  plist::appendJson(machine, machineOf(run));
   object.add("id", run.id).addOrNull("boot", run.boot).addOrNull("version", run.version).add("started", run.started);
-  return object.addOptional("ended", run.ended).addOrNull("end_reason", run.endReason).text();
+  object.addOptional("ended", run.ended).addOrNull("end_reason", run.endReason);
+  return object.addJson("machine", machine).text();
 }
 
 std::vector<std::string> spansJson(const std::vector<SessionTimeline::Span>& spans, const char* textName) {
