@@ -187,6 +187,33 @@ TEST_F(RecorderRetention, FileShrinksWhenTheLimitCameDown) {
   EXPECT_EQ(askOne(file(), "PRAGMA integrity_check"), "ok");
 }
 
+TEST_F(RecorderRetention, OtherLimitsHoldForWhatIsThereAndWhileNothingComes) {
+  options_.maxAgeDays = 30;
+  start();
+  recordMany(1000);
+  ASSERT_TRUE(flush());
+  clock_.advance(std::chrono::hours(24 * 20));
+  recordMany(10);
+  ASSERT_TRUE(flush());
+  RecorderOptions shorter = options_;
+  shorter.maxAgeDays = 10;
+  recorder_->setRetention(shorter);
+  EXPECT_TRUE(eventually([&] { return recorder_->counters().expired == 1000; }));
+}
+
+TEST_F(RecorderRetention, FileShrinksWhileItRunsWhenTheLimitComesDown) {
+  options_.maxMegabytes = 16;
+  start();
+  recordMany(10'000, 1000);
+  ASSERT_TRUE(flush());
+  EXPECT_EQ(recorder_->counters().expired, 0U);
+  RecorderOptions smaller = options_;
+  smaller.maxMegabytes = 2;
+  recorder_->setRetention(smaller);
+  EXPECT_TRUE(eventually([&] { return recorder_->counters().expired > 7000; }));
+  EXPECT_TRUE(eventually([&] { return std::stol(askOne(file(), "PRAGMA page_count")) * 8192 <= 2L << 20; }));
+}
+
 TEST_F(RecorderRetention, CommitsGoOnWhileALotIsRemoved) {
   options_.maxMegabytes = 64;
   start();

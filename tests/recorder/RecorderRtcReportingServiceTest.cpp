@@ -79,6 +79,19 @@ TEST_F(RecorderRtcReportingServiceTest, CompletionReportsTheListAnEmptyOneOrNone
   }
 }
 
+TEST_F(RecorderRtcReportingServiceTest, AnotherBehaviourHoldsForStartsThatComeAfterIt) {
+  const auto service = makeService({.startDelay = 10ms});
+  const auto session = makeSession(*service);
+  std::vector<Backends> reported;
+  const auto note = [&](const Backends& backends) { reported.push_back(backends); };
+  session->startConfiguration(note);
+  service->setBehaviour({.available = false, .backends = {"other"}});
+  session->startConfiguration(note);
+  workQueues_.advance(10ms);
+  EXPECT_EQ(reported, (std::vector<Backends>{{{"recorder"}}, {{"other"}}}));
+  EXPECT_EQ(service->newHierarchyToken({}), std::nullopt);
+}
+
 TEST_F(RecorderRtcReportingServiceTest, CompletionWithoutADelayComesWithinTheCall) {
   const auto service = makeService({});
   std::optional<std::thread::id> thread;

@@ -162,6 +162,17 @@ TEST_F(RecorderSnareServiceTest, RefusesWithTheReasonAndRecordsTheRequestAllTheS
   EXPECT_EQ(rows("name"), (std::vector<std::string>{"startSession"}));
 }
 
+TEST_F(RecorderSnareServiceTest, RefusesOrNoMoreAsItIsToldWhileItRuns) {
+  RecorderSnareService& service = makeService(SnareReason::DailyLimitExceeded);
+  const auto reporter = service.createReporter();
+  service.setRefusal(std::nullopt);
+  EXPECT_TRUE(reporter->startSession({{{"domain", "d"}}, 60, {}}, replies_.handler()));
+  EXPECT_EQ(replies_.once(1).at(0).get(SnareReplyKeys::kSuccess), plist::ValueView(true));
+  service.setRefusal(SnareReason::DailyLimitExceeded);
+  EXPECT_TRUE(reporter->startSession({{{"domain", "d"}}, 60, {}}, replies_.handler()));
+  EXPECT_EQ(replies_.once(2).at(1).get(SnareReplyKeys::kReasonCode), plist::ValueView(6));
+}
+
 TEST_F(RecorderSnareServiceTest, ARequestLivesOnWhenItsReporterIsGone) {
   makeService();
   EXPECT_TRUE(service_->createReporter()->requestSnapshot({}, replies_.handler()));

@@ -29,6 +29,17 @@ TEST_F(RecorderTallyServiceTest, NamesAreInUseByPattern) {
   EXPECT_FALSE(service.eventIsInUse("sys.oxbow.wisp.Playback.Start"));
 }
 
+TEST_F(RecorderTallyServiceTest, OtherPatternsHoldAlsoForNamesThatWereAskedFor) {
+  RecorderTallyService service = makeService({"a*"});
+  EXPECT_TRUE(service.eventIsInUse("a1"));
+  EXPECT_FALSE(service.eventIsInUse("b1"));
+  service.setInUse({"b*"});
+  EXPECT_FALSE(service.eventIsInUse("a1"));
+  EXPECT_TRUE(service.eventIsInUse("b1"));
+  service.setInUse({"*"});
+  EXPECT_TRUE(service.eventIsInUse("a1"));
+}
+
 TEST_F(RecorderTallyServiceTest, NothingIsInUseWithoutPatterns) {
   RecorderTallyService service = makeService({});
   EXPECT_FALSE(service.eventIsInUse("sys.oxbow.tarnkit.Playback.Start"));

@@ -28,6 +28,22 @@ class SocketQuotasTest : public testing::SocketFixture {
   }
 };
 
+TEST_F(SocketQuotasTest, OtherBoundsHoldAtOnceAndTheLongestFrameForThoseWhoCome) {
+  serve();
+  TestClient client(path_);
+  EXPECT_EQ(refusalOf(client, requestOf(Operation::CreateReportingSession, 1)), "served");
+  linux_host::HostLimits changed = limits;
+  changed.quotas.sessionsPerConnection = 1;
+  changed.maxFrameBytes = 64;
+  running_.onQueue([&] { host_->adopt(changed); });
+  EXPECT_EQ(refusalOf(client, requestOf(Operation::CreateReportingSession, 2)), "over quota: sessions 1 of 1");
+  const wire::Request large = testing::messageRequest({{"text", std::string(100, 'x')}});
+  EXPECT_TRUE(client.ask(7, large));
+  TestClient later(path_);
+  ASSERT_TRUE(later.request(1, large));
+  EXPECT_TRUE(later.ended());
+}
+
 TEST_F(SocketQuotasTest, SessionsOfAConnectionAreBounded) {
   limits.quotas.sessionsPerConnection = 2;
   serve();

@@ -39,6 +39,17 @@ TEST_F(LogOverflow, RepeatedMessageIsRedundantThoughTheFirstIsOnDisk) {
   EXPECT_EQ(session->messages().size(), 1U);
 }
 
+TEST_F(LogOverflow, OtherBoundsOfTheStoreHoldForLogsThatAreThere) {
+  constexpr std::size_t kMuch = std::size_t{1} << 40U;
+  platform_.overflow.setBounds(kMuch, kMuch);
+  const auto session = makeSession();
+  EXPECT_FALSE(isRedundant(*session, {{"volume", 0.5}}));
+  EXPECT_EQ(session->messages().overflowed(), 0U);
+  platform_.overflow.setBounds(1, kMuch);
+  EXPECT_FALSE(isRedundant(*session, {{"volume", 0.75}}));
+  EXPECT_GT(session->messages().overflowed(), 0U);
+}
+
 TEST_F(LogOverflow, OnlyTheNewestOfItsKindIsComparedWith) {
   const auto session = makeSession();
   EXPECT_FALSE(isRedundant(*session, {{"volume", 0.5}}));
