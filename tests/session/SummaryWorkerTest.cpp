@@ -61,22 +61,6 @@ TEST_F(SummaryWorker, MessageWithDurationAndOverloadCountsTowardsTheActiveTimeOn
   EXPECT_EQ(summary["overload_count"].asInt64(), 1);
 }
 
-TEST_F(SummaryWorker, CountsWhateverShapesComeBetween) {
-  const auto session = makeSession();
-  session->start();
-  session->sendMessage(message({{"issue_type", "underrun"}}));
-  session->sendMessage(message({{"issue_type", "overload"}}));  // the same keys
-  session->sendMessage(message({{"volume", 1}}));
-  session->sendMessage(message({{"session_duration", 1}}));
-  session->sendMessage(message({{"volume", 2}}));
-  session->sendMessage(message({{"session_duration", 2}}));
-  session->sendMessage(message({{"issue_type", "overload"}, {"volume", 1}}));
-  const plist::Dictionary summary = summaryOf(session);
-  EXPECT_EQ(summary["total_active_time"].doubleValue(), 3.0);
-  EXPECT_EQ(summary["active_count"].asInt64(), 2);
-  EXPECT_EQ(summary["overload_count"].asInt64(), 2);
-}
-
 TEST_F(SummaryWorker, RedundantMessagesAreNotCountedAsActivity) {
   const auto session = makeSession();
   session->start();
