@@ -34,6 +34,18 @@ TEST_F(RecorderConditions, AFileThatIsSetAsideIsOne) {
   EXPECT_EQ(conditions_.countOf(LogCondition::StoreSetAside), 1U);
 }
 
+TEST_F(RecorderConditions, AFileThatCannotBeWrittenIsOne) {
+  EXPECT_TRUE(run());
+  change(file(), "PRAGMA user_version = 99");  // of a newer service, and left alone
+  {
+    Recorder recorder(options_, conditions_, clock_);
+    recorder.start();
+    recorder.record("tally", "waits", {}, {}, clock_.epochSeconds());
+    EXPECT_TRUE(eventually([this] { return conditions_.countOf(LogCondition::StoreUnwritable) == 1; }));
+  }
+  EXPECT_EQ(conditions_.countOf(LogCondition::StoreSetAside), 0U);
+}
+
 TEST_F(RecorderConditions, CommittedEventsThatAreGoneAreOne) {
   EXPECT_TRUE(run());
   std::filesystem::remove(file());
