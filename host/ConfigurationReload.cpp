@@ -71,6 +71,7 @@ void ConfigurationReload::takeOver(const HostConfiguration& read) {
 void ConfigurationReload::refuse(const std::string& why) {
   ++refused_;
   lastFault_ = why;
+  const platform::LogConditionScope condition(platform::LogCondition::ReloadRefused);
   logPrefixed(log_, kHostCategory, platform::LogLevel::Error, kModule,
               "configuration " + std::to_string(generation_) + " stays in force: " + why);
 }

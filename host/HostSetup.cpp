@@ -7,9 +7,13 @@
 #include <chrono>
 #include <utility>
 
+#include "host/log/JournalOutput.h"
 #include "host/log/LogTarget.h"
+#include "host/log/PrefixedLog.h"
+#include "host/loop/WorkOwner.h"
 #include "host/settings/StateDirectory.h"
 #include "host/system/Files.h"
+#include "platform/LogCondition.h"
 
 namespace tarn::linux_host {
 
@@ -32,13 +36,29 @@ Result<ListenSocket> openSocket(const ServiceOptions& options) {
   return ListenSocket::claim(*options.socketPath);
 }
 
+// The line on stderr, which there is too, has no identifier in the journal. Without a journal it is enough.
+void tellJournal(const platform::Clock& clock, const Error& wrong) {
+  JournalOutput journal;
+  if (journal.open().failed()) return;
+  const platform::LogConditionScope condition(platform::LogCondition::ConfigurationRefused);
+  constexpr int kLine = __LINE__;
+  const std::string text = prefixed("HostSetup", wrong.text, kLine);
+  static_cast<void>(journal.write(
+      journal.formed(clock.epochSeconds(), {kHostCategory, platform::LogLevel::Error, "HostSetup", kLine, text})));
+}
+
 }  // namespace
 
 Status HostSetup::prepare(const ServiceOptions& options) {
   // Whatever a caller's mask lets through: what the service makes is for its user and group alone.
   ::umask(::umask(0) | S_IWGRP | S_IRWXO);
   options_ = options;
-  if (const Status read = readSettings(); read.failed()) return Error{kExitConfiguration, read->text};
+  if (const Status read = readSettings(); read.failed()) {
+    if (options.logTarget == "journal") {
+      tellJournal(clock, *read);
+    }
+    return Error{kExitConfiguration, read->text};
+  }
   if (const Status prepared = prepareStateDirectory(options.stateDirectory); prepared.failed()) {
     return Error{kExitFailure, prepared->text};
   }
@@ -49,7 +69,9 @@ Status HostSetup::prepare(const ServiceOptions& options) {
   if (const Status held = holdStateDirectory(options.stateDirectory, stateLock_); held.failed()) {
     return Error{kExitFailure, held->text};
   }
-  Result<std::unique_ptr<QueuedLog>> opening = openLog(options.logTarget, configuration.logLevel, clock);
+  Result<std::unique_ptr<QueuedLog>> opening =
+      openLog(options.logTarget, configuration.logLevel, clock, JournalOutput::kSocket,
+              []() noexcept { return WorkOwner::current(); });
   if (opening.failed()) return Error{kExitFailure, opening.error->text};
   queuedLog_ = std::move(opening.value);
   log = std::make_unique<LogFloodGuard>(*queuedLog_, clock);

@@ -12,6 +12,8 @@
 
 namespace tarn::recorder {
 
+using platform::LogCondition;
+
 namespace {
 
 using SteadyClock = std::chrono::steady_clock;
@@ -103,13 +105,15 @@ void EventWriter::tellWhatOpeningFound() {
                 " events have the present one now");
   }
   if (const std::int64_t last = file_.takeGoneUpTo(); last > 0) {
-    log_.error("recorder file " + path + " holds nothing of the events up to " + std::to_string(last) +
-               " that were committed: it is new, or its log is gone");
+    log_.error(LogCondition::StoreDamaged, "recorder file " + path + " holds nothing of the events up to " +
+                                               std::to_string(last) +
+                                               " that were committed: it is new, or its log is gone");
   }
   if (const auto missing = file_.takeMissing()) {
     missing_ = missing;
-    log_.error("recorder file " + path + " misses " + std::to_string(missing->count()) + " committed events (" +
-               textOf({*missing}) + "): its log is damaged, cut or gone");
+    log_.error(LogCondition::StoreDamaged, "recorder file " + path + " misses " + std::to_string(missing->count()) +
+                                               " committed events (" + textOf({*missing}) +
+                                               "): its log is damaged, cut or gone");
   }
 }
 
@@ -336,8 +340,8 @@ bool EventWriter::resolve(const Error& error) {
   lacksMemory_ = isShortage(error.code);
   switch (remedyFor(error.code)) {
     case Remedy::Moved:
-      log_.error("recorder file " + file_.path().string() + " was taken away (" + error.text +
-                 "); what it held went with it, a fresh one is begun");
+      log_.error(LogCondition::StoreDamaged, "recorder file " + file_.path().string() + " was taken away (" +
+                                                 error.text + "); what it held went with it, a fresh one is begun");
       file_.leave();
       return true;
     case Remedy::SetAside:
@@ -364,8 +368,9 @@ bool EventWriter::resolveDamage(const Error& error) {
   suspected_ = false;
   const auto upTo = file_.isInDoubt() ? std::optional(file_.lastId()) : std::nullopt;
   carrying_ = std::make_unique<CarryOver>(aside.value, upTo);
-  log_.error("recorder file " + file_.path().string() + " can't be used (" + error.text + "); it is set aside as " +
-             aside.value.filename().string() + " and a fresh one is begun");
+  log_.error(LogCondition::StoreSetAside, "recorder file " + file_.path().string() + " can't be used (" + error.text +
+                                              "); it is set aside as " + aside.value.filename().string() +
+                                              " and a fresh one is begun");
   return true;
 }
 
@@ -374,7 +379,8 @@ void EventWriter::noteFault(const std::string& problem) {
   if (faulty_) return;
   faulty_ = true;
   faultSince_ = clock_.monotonic();
-  log_.error("recorder can't write to " + file_.path().string() + ": " + problem + "; events are kept until it can");
+  log_.error(LogCondition::StoreUnwritable,
+             "recorder can't write to " + file_.path().string() + ": " + problem + "; events are kept until it can");
 }
 
 }  // namespace tarn::recorder

@@ -9,6 +9,7 @@
 #include <string_view>
 
 #include "platform/Log.h"
+#include "platform/LogCondition.h"
 
 namespace tarn::recorder {
 
@@ -19,6 +20,11 @@ class RecorderLog {
 
   // What costs events, or would without a remedy; at the level error.
   void error(std::string_view text, int line = __builtin_LINE()) noexcept;
+  // The same of what a person acts on.
+  void error(platform::LogCondition condition, std::string_view text, int line = __builtin_LINE()) noexcept {
+    const platform::LogConditionScope scope(condition);
+    error(text, line);
+  }
   // What somebody may want to know, as that a fault is over; at the level default.
   void notice(std::string_view text, int line = __builtin_LINE()) noexcept;
 

@@ -7,6 +7,7 @@
 #include <string>
 #include <utility>
 
+#include "platform/LogCondition.h"
 #include "recorder/Recorder.h"
 
 namespace tarn::recorder {
@@ -36,6 +37,7 @@ void Recorder::tellWhatWasLost() {
   lastId_ = writer_.lastId();
   keepCounts();
   if (lostBefore_ > 0) {
+    const platform::LogConditionScope condition(platform::LogCondition::RunKilled);
     tell([&] {
       return "recorder lost " + std::to_string(lostBefore_) +
              " events that were handed over to the run before and not committed when it ended";

@@ -10,6 +10,8 @@
 #include <cstring>
 #include <utility>
 
+#include "host/log/JournalCatalog.h"
+#include "host/log/LogClient.h"
 #include "host/system/SystemError.h"
 #include "plist/EscapedText.h"
 
@@ -35,6 +37,18 @@ void addField(std::string& out, std::string_view name, std::string_view value) {
   out += '\n';
 }
 
+// On whose behalf the thread works that logs.
+void addClient(std::string& out, platform::SessionNumber session) {
+  const LogClient client = LogClientScope::current();
+  if (client.connection != 0) {
+    addField(out, "TARN_PID", std::to_string(client.process));
+    addField(out, "TARN_UID", std::to_string(client.user));
+  }
+  if (session != 0) {
+    addField(out, "TARN_SESSION", std::to_string(session));
+  }
+}
+
 bool fillAddress(const std::string& path, sockaddr_un& address) {
   address.sun_family = AF_UNIX;
   if (path.size() >= sizeof address.sun_path) return false;
@@ -52,7 +66,8 @@ UniqueDescriptor makeSocket() {
 
 }  // namespace
 
-JournalOutput::JournalOutput(std::string socketPath) : path_(std::move(socketPath)) {}
+JournalOutput::JournalOutput(std::string socketPath, SessionSource sessionOf)
+    : path_(std::move(socketPath)), sessionOf_(sessionOf) {}
 
 Status JournalOutput::open() {
   sockaddr_un address{};
@@ -81,6 +96,10 @@ std::string JournalOutput::formed(double, const platform::LogEntry& entry) const
     addField(fields, "CODE_LINE", std::to_string(entry.line));
   }
   addField(fields, "SYSLOG_IDENTIFIER", "tarnreportingd");
+  if (const std::string_view id = messageIdOf(platform::LogConditionScope::current()); !id.empty()) {
+    addField(fields, "MESSAGE_ID", id);
+  }
+  addClient(fields, sessionOf_ == nullptr ? 0 : sessionOf_());
   return fields;
 }
 

@@ -7,6 +7,9 @@
 //   TARN_SUBSYSTEM     the category's subsystem
 //   CODE_FILE, CODE_LINE   the module and its line, when the entry has them
 //   SYSLOG_IDENTIFIER  the program
+//   MESSAGE_ID         of the condition that the entry tells of, when it is one of host/log/JournalCatalog.h
+//   TARN_PID, TARN_UID the client on whose behalf the thread works, when it does so for one
+//   TARN_SESSION       the session that it works for, counted from 1 in each run, likewise
 //
 // One datagram an entry, which the journal takes at once or not at all: its own library waits for a journal that
 // stalls. A field is NAME=value and a line end or, when the value has several lines, NAME, a line end, the value's
@@ -21,6 +24,7 @@
 
 #include "host/log/LogOutput.h"
 #include "host/system/UniqueDescriptor.h"
+#include "platform/SessionRecords.h"
 #include "plist/Result.h"
 
 namespace tarn::linux_host {
@@ -30,8 +34,11 @@ class JournalOutput final : public LogOutput {
   // Where systemd's journal listens for entries of this form; another path serves tests.
   static constexpr const char* kSocket = "/run/systemd/journal/socket";
 
+  // For which session the calling thread works, 0 for none.
+  using SessionSource = platform::SessionNumber (*)() noexcept;
+
   // Opens nothing; the path must fit a socket address (107 bytes), or open() fails.
-  explicit JournalOutput(std::string socketPath = kSocket);
+  explicit JournalOutput(std::string socketPath = kSocket, SessionSource sessionOf = nullptr);
   JournalOutput(const JournalOutput&) = delete;
   JournalOutput& operator=(const JournalOutput&) = delete;
 
@@ -51,6 +58,7 @@ class JournalOutput final : public LogOutput {
  private:
   // Not connected: see write().
   const std::string path_;
+  const SessionSource sessionOf_;
   UniqueDescriptor socket_;
 };
 

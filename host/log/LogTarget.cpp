@@ -8,6 +8,7 @@
 #include "host/log/FileOutput.h"
 #include "host/log/LineOutput.h"
 #include "host/log/PrefixedLog.h"
+#include "platform/LogCondition.h"
 
 namespace tarn::linux_host {
 
@@ -18,11 +19,12 @@ constexpr std::string_view kModule = "LogTarget";
 }  // namespace
 
 Result<std::unique_ptr<QueuedLog>> openLog(std::string_view target, platform::LogLevel threshold,
-                                           const platform::Clock& clock, const std::string& journalSocket) {
+                                           const platform::Clock& clock, const std::string& journalSocket,
+                                           JournalOutput::SessionSource sessionOf) {
   std::unique_ptr<LogOutput> output;
   std::string fallback;
   if (target == "journal") {
-    auto journal = std::make_unique<JournalOutput>(journalSocket);
+    auto journal = std::make_unique<JournalOutput>(journalSocket, sessionOf);
     if (const auto error = journal->open(); error.failed()) {
       fallback = "no journal on this machine, the log goes to the standard error stream" + errorSuffix(*error);
     } else {
@@ -42,6 +44,7 @@ Result<std::unique_ptr<QueuedLog>> openLog(std::string_view target, platform::Lo
   auto log = std::make_unique<QueuedLog>(std::move(output), clock, threshold);
   log->start();
   if (!fallback.empty()) {
+    const platform::LogConditionScope condition(platform::LogCondition::LogUnavailable);
     logPrefixed(*log, kHostCategory, platform::LogLevel::Error, kModule, fallback);
   }
   return {std::move(log), {}};

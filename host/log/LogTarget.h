@@ -17,9 +17,10 @@ namespace tarn::linux_host {
 // `target` is "stderr", "journal" or a file's path. Where there is no journal the standard error stream takes its
 // place, with a line that says so; a file that can't be opened is an error, with its name ("cannot open log file PATH:
 // why"), and there is no log then. The log has been started. The clock outlives the log; `journalSocket` is another one
-// for tests.
+// for tests; `sessionOf` tells the journal which session an entry is of.
 Result<std::unique_ptr<QueuedLog>> openLog(std::string_view target, platform::LogLevel threshold,
                                            const platform::Clock& clock,
-                                           const std::string& journalSocket = JournalOutput::kSocket);
+                                           const std::string& journalSocket = JournalOutput::kSocket,
+                                           JournalOutput::SessionSource sessionOf = nullptr);
 
 }  // namespace tarn::linux_host

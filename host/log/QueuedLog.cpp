@@ -8,6 +8,7 @@
 #include <utility>
 
 #include "host/log/PrefixedLog.h"
+#include "platform/LogCondition.h"
 
 namespace tarn::linux_host {
 
@@ -139,6 +140,7 @@ void QueuedLog::lose() {
 std::string QueuedLog::lostLine(std::uint64_t lost, int error) const {
   constexpr int kLine = __LINE__;
   const std::string why = error == 0 ? ": more came than could be written" : errorSuffix(error);
+  const platform::LogConditionScope condition(platform::LogCondition::LogUnavailable);
   const std::string text = prefixed(kModule, std::to_string(lost) + " log lines were lost" + why, kLine);
   return output_->formed(clock_.epochSeconds(), {kHostCategory, platform::LogLevel::Error, kModule, kLine, text});
 }

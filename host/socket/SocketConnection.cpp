@@ -12,6 +12,7 @@
 #include "host/log/PrefixedLog.h"
 #include "host/ring/ReceivedDescriptors.h"
 #include "host/system/MemoryReserve.h"
+#include "platform/LogCondition.h"
 
 namespace tarn::linux_host {
 
@@ -310,7 +311,19 @@ bool SocketConnection::countCut(CutReason reason) noexcept {
 }
 
 void SocketConnection::tellCut(std::string_view line) noexcept {
+  const platform::LogConditionScope condition(platform::LogCondition::ClientCut);
+  const LogClientScope client(client_);
   logPrefixed(host_.log, kConnectionCategory, platform::LogLevel::Error, kModule, line);
+}
+
+void SocketConnection::tellQuota(std::string_view why) noexcept {
+  const platform::LogConditionScope condition(platform::LogCondition::QuotaRefused);
+  const LogClientScope client(client_);
+  MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, [&] {
+    std::string line = "refused a request of " + description_ + ": ";
+    line += why;
+    logPrefixed(host_.log, kConnectionCategory, platform::LogLevel::Default, kModule, line);
+  });
 }
 
 void SocketConnection::beginEnd(bool interrupted) {

@@ -178,6 +178,7 @@ class SocketConnection final : public platform::Connection,
   }
   // False when it ends already: then nobody waits for its replies any more.
   bool countCut(CutReason reason) noexcept;
+  void tellQuota(std::string_view why) noexcept;
   void tellCut(std::string_view line) noexcept;
   // Made without memory: it is short enough for the string itself.
   static std::string outOfMemoryText() noexcept { return std::string(wire::kOutOfMemory); }
@@ -215,6 +216,7 @@ class SocketConnection final : public platform::Connection,
   // What it takes of its user's share.
   QuotaUse use_;
   HalfFrames::Place halfFrame_;
+  bool quotaTold_ = false;           // that a request was over quota: one line a connection will do
   bool framesTaken_ = false;         // since the half frame was noted
   std::uint32_t watchedEvents_ = 0;  // 0: not watched at all
 

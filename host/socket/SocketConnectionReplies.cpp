@@ -47,6 +47,9 @@ void SocketConnection::refuseRequest(std::uint64_t id, wire::ErrorCode code, std
   }
   lane_.spend(1);
   host_.ledger.countRefusal(code);
+  if (code == wire::ErrorCode::OverQuota && !std::exchange(quotaTold_, true)) {
+    tellQuota(why);
+  }
   const platform::RemoteError error{wire::kErrorDomain, static_cast<std::int64_t>(code), std::move(why)};
   reply(id, error);
 }

@@ -18,7 +18,8 @@ FILES = (
     "lib/systemd/user/tarnreportingd.service", "lib/systemd/user/tarnreportingd.socket",
     "share/bash-completion/completions/tarnreportingd", "share/zsh/site-functions/_tarnreportingctl",
     "share/fish/vendor_completions.d/tarnreportingctl.fish",
-    "lib/sysusers.d/tarnreporting.conf", "lib/tmpfiles.d/tarnreporting.conf",
+    "lib/sysusers.d/tarnreporting.conf", "lib/systemd/catalog/tarnreporting.catalog",
+    "lib/tmpfiles.d/tarnreporting.conf",
     "etc/tarnreporting/tarnreportingd.toml",
     "lib/tarnkit/traceanalysis.so", "share/doc/tarnkit/LICENSE", "share/doc/tarnkit/README.md",
     "share/doc/tarnkit/operations.md", "share/doc/tarnkit/wire.md",
@@ -88,6 +89,20 @@ class InstalledTree(unittest.TestCase):
         done = run(self.at("bin", "tarnreportingd"), "--config", shown, "--state-dir", shown + "/none",
                    "--socket", os.path.join(self.folder, "none.sock"))
         self.assertEqual(done.returncode, 1, done.stderr)
+
+    @unittest.skipUnless(shutil.which("journalctl"), "journalctl is missing")
+    def test_the_journal_takes_the_catalogue(self):
+        with tempfile.TemporaryDirectory() as root:
+            folder = os.path.join(root, "usr/lib/systemd/catalog")
+            os.makedirs(folder)
+            os.makedirs(os.path.join(root, "var/lib/systemd/catalog"))
+            shutil.copy(self.at("lib/systemd/catalog/tarnreporting.catalog"), folder)
+            update = run("journalctl", "--root", root, "--update-catalog")
+            self.assertEqual((update.returncode, update.stderr), (0, ""))
+            told = run("journalctl", "--root", root, "--list-catalog").stdout.splitlines()
+        self.assertEqual(len(told), 9)
+        for line in told:
+            self.assertRegex(line, r"^[0-9a-f]{32} tarnreporting: .+$")
 
     def test_the_units_name_what_the_service_needs(self):
         service = self.settings("lib/systemd/system/tarnreportingd.service")

@@ -27,6 +27,7 @@ EXCEPTIONS = {
     ("host/log/LogClient.h", "current_"): "for whom a thread works belongs to the thread",
     ("host/loop/WorkLane.h", "current_"): "and so does whose work of it that is",
     ("host/loop/WorkOwner.h", "current_"): "for which session a thread works belongs to the thread",
+    ("platform/LogCondition.h", "current_"): "what a thread just logs about belongs to the thread",
     ("testing/backends/RecordingSessionRecords.h", "current_"): "and so it does in tests",
     ("testing/backends/OwnMemory.h", "depth_"): "what a fake does on a thread belongs to the thread",
     ("host/system/MemoryReserve.h", "refusable_"): "whether a thread's work may be refused belongs to the thread",

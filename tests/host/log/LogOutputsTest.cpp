@@ -13,8 +13,10 @@
 
 #include "host/log/FileOutput.h"
 #include "host/log/JournalOutput.h"
+#include "host/log/LogClient.h"
 #include "host/log/LogTarget.h"
 #include "host/system/UniqueDescriptor.h"
+#include "platform/LogCondition.h"
 #include "tests/host/log/LogFixture.h"
 
 namespace tarn::linux_host {
@@ -146,6 +148,23 @@ TEST_F(JournalOutputTest, EntryBecomesFields) {
   EXPECT_EQ(received(),
             "MESSAGE=                  Session:42    one\nPRIORITY=3\nTARN_CATEGORY=tarnss\n"
             "TARN_SUBSYSTEM=sys.oxbow.tarnkit\nCODE_FILE=Session\nCODE_LINE=42\nSYSLOG_IDENTIFIER=tarnreportingd\n");
+}
+
+TEST_F(JournalOutputTest, EntryOfAConditionHasItsIdentifier) {
+  const platform::LogConditionScope scope(platform::LogCondition::StoreSetAside);
+  EXPECT_TRUE(output_.formed(5, entry("text")).ends_with("\nMESSAGE_ID=f1ba60a9267a4415a8d4d183ae0e2eb1\n"));
+  {
+    const platform::LogConditionScope none(platform::LogCondition::None);
+    EXPECT_EQ(output_.formed(5, entry("text")).find("MESSAGE_ID"), std::string::npos);
+  }
+  EXPECT_NE(output_.formed(5, entry("text")).find("MESSAGE_ID"), std::string::npos);
+}
+
+TEST_F(JournalOutputTest, EntryOnBehalfOfAClientNamesItAndTheSession) {
+  const JournalOutput output(path_, []() noexcept -> platform::SessionNumber { return 12; });
+  const LogClientScope scope({.connection = 3, .process = 812, .user = 1000});
+  EXPECT_TRUE(output.formed(5, entry("text")).ends_with("\nTARN_PID=812\nTARN_UID=1000\nTARN_SESSION=12\n"));
+  EXPECT_TRUE(output_.formed(5, entry("text")).ends_with("\nTARN_PID=812\nTARN_UID=1000\n"));
 }
 
 TEST_F(JournalOutputTest, SeveralLinesAreOneFieldWithItsLength) {
