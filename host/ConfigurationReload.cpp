@@ -7,6 +7,7 @@
 #include <utility>
 
 #include "host/log/PrefixedLog.h"
+#include "platform/LogCondition.h"
 
 namespace tarn::linux_host {
 
