@@ -23,6 +23,9 @@ WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < {events
 """
 ALL = "SELECT id, time, backend, name, payload, detail FROM events WHERE id <= ? ORDER BY id"
 
+# The layout that the service of today keeps.
+LAYOUT = 2
+
 
 def digest_of(database, events):
     """How many events there are, and what they say."""
@@ -85,11 +88,11 @@ def migrate_whole(context, figures, ground):
         raise RuntimeError(f"the service doesn't start: {ground.service.log_text()[-500:]}")
     took = time.monotonic() - begun
     ground.service.stop(patience=START_PATIENCE)
-    look(context, figures, ground, "after one that nobody disturbed", wanted=(1,))
+    look(context, figures, ground, "after one that nobody disturbed", wanted=(LAYOUT,))
     return took
 
 
-def look(context, figures, ground, when, wanted=(0, 1)):
+def look(context, figures, ground, when, wanted=(0, LAYOUT)):
     """The layout's version then."""
     version, same = ground.version()
     if version not in wanted or not same:
@@ -110,7 +113,7 @@ def run(context, figures):
         killer.join()
         ground.service.process.wait()
         figures["kills"] += 1
-        if look(context, figures, ground, f"after kill {figures['kills']}") == 1:
+        if look(context, figures, ground, f"after kill {figures['kills']}") == LAYOUT:
             figures["new_after"] += 1
             ground.lay_out()
         else:
@@ -120,4 +123,4 @@ def run(context, figures):
         context.fail(f"no start after the kills: {ground.service.log_text()[-500:]}")
         return
     ground.service.stop(patience=START_PATIENCE)
-    look(context, figures, ground, "in the end", wanted=(1,))
+    look(context, figures, ground, "in the end", wanted=(LAYOUT,))

@@ -72,7 +72,7 @@ class Pages(unittest.TestCase):
     def test_every_setting_stands_in_the_page_of_the_configuration(self):
         text = pages.scdoc(pages.expanded(os.path.join(SOURCE, "docs", "manual", "tarnreportingd.toml.5.md")))
         with open(os.path.join(SOURCE, "host", "settings", "HostConfiguration.cpp"), encoding="utf-8") as file:
-            settings = re.findall(r'\{"(\w+)", "(\w+)",', file.read())
+            settings = re.findall(r'setting\(\s*"(\w+)", "(\w+)",', file.read())
         self.assertGreater(len(settings), 20)
         for section, key in settings:
             self.assertIn(pages.inline(f"`[{section}] {key}`"), text)

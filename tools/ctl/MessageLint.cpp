@@ -162,9 +162,17 @@ std::optional<std::string> likelyFinding(std::string_view name, const Place& pla
   return std::nullopt;
 }
 
+// They are clients, so whoever sends what they send does as they do.
+constexpr std::string_view kAdapters = "StreamAdapters";
+
 std::optional<std::string> unreadFinding(std::string_view name, const MessageKey* key, const Place& place,
                                          bool ownKeysAreFine) {
   const bool isOfPlace = key != nullptr && (place.isConfiguration ? key->inConfigurations : key->inMessages);
+  if (isOfPlace && key->readers.empty() && key->writers == kAdapters) {
+    if (ownKeysAreFine) return std::nullopt;
+    return "no part reads the key " + quoted(name) + ": it is there for people to read (" + std::string(kAdapters) +
+           ")";
+  }
   if (isOfPlace && key->readers.empty()) {
     return "no part reads the key " + quoted(name) + ": the service writes it itself (" + std::string(key->writers) +
            ")";

@@ -123,7 +123,9 @@ TEST_F(RecorderRepeated, AFileFromBeforeGetsTheTableAndKeepsWhatItHas) {
   send(startSession(), message(3, 10));
   ASSERT_TRUE(flush());
   stop();
-  change(file(), "DROP TABLE redundant_messages; DROP TABLE row_hashes");
+  change(file(),
+         "DROP TABLE redundant_messages; DROP TABLE row_hashes; ALTER TABLE runs DROP COLUMN machine; PRAGMA "
+         "user_version = 1");
   EXPECT_TRUE(inspectStore(file()).value.isWhole()) << "nothing is wrong with one of before";
   SessionReader reader(file());
   ASSERT_TRUE(reader.open().ok());

@@ -143,7 +143,8 @@ TEST_F(StoreOfManySessions, SpansThatBeganAnywhereAreBroughtInOrder) {
   fill();
   stop();
   const Rows before = fromRows("WHERE session = 2");
-  change(file(), "UPDATE session_spans SET first = first + 3");
+  change(file(),
+         "UPDATE session_spans SET first = first + 3; ALTER TABLE runs DROP COLUMN machine; PRAGMA user_version = 1");
   EXPECT_NE(rows("*", "events WHERE session = 2 ORDER BY id"), before);
   start().waitUntilOpened();
   EXPECT_EQ(rows("*", "events WHERE session = 2 ORDER BY id"), before);
