@@ -121,7 +121,8 @@ TEST(PackedDraft, HoldsNothingOfTheOneBefore) {
   fill(draft, {7}, one);
   expectTheSame(draft.dictionary(), built({7}, one));
   expectTheSame(first, built(values, keys));
-  fill(draft, {}, KeyList());
+  const KeyList none;
+  fill(draft, {}, none);
   EXPECT_TRUE(draft.dictionary().empty());
 }
 
