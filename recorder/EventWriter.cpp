@@ -255,11 +255,13 @@ Status EventWriter::append(const SessionNote& note) {
   return file_.append(note);
 }
 
-// The two events of a message carry one payload, which becomes text once.
+// The two events of a message carry one payload, which becomes text once. The text of the last one stays until the next
+// is whole: where there is no memory for that, the group begins anew with the last one.
 const std::string& EventWriter::payloadText(const plist::Dictionary& payload) {
   if (!lastPayload_.sharesStorageWith(payload)) {
-    payloadText_.clear();
-    plist::appendJson(payloadText_, payload);
+    nextPayloadText_.clear();
+    plist::appendJson(nextPayloadText_, payload);
+    payloadText_.swap(nextPayloadText_);
     lastPayload_ = payload;
   }
   return payloadText_;
@@ -269,6 +271,7 @@ bool EventWriter::settle() {
   // A payload that is kept for its text alone would keep its memory too.
   lastPayload_ = plist::Dictionary();
   payloadText_ = "{}";
+  nextPayloadText_.clear();
   if (!file_.isOpen()) return true;
   limitDatabase();
   tellLongLog();

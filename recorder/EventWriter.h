@@ -128,6 +128,7 @@ class EventWriter {
   NewestMessages newest_;          // while repeated ones are marked
   plist::Dictionary lastPayload_;  // whose text payloadText_ is
   std::string payloadText_ = "{}";
+  std::string nextPayloadText_;
   // Kept for its room.
   std::string detailText_;
   // Of the fault that lasts, on the monotonic clock.

@@ -140,6 +140,24 @@ TEST_F(RecorderShortMemory, TheWriterTriesAgainAndWritesEverythingOnce) {
   EXPECT_TRUE(filesSetAside().empty());
 }
 
+TEST_F(RecorderShortMemory, AnEventKeepsItsOwnTextWhenThereIsNoneForTheNextOnes) {
+  gatherForLong();
+  startSilently();
+  int happened = 0;
+  for (std::uint64_t ordinal = 1; ordinal < 60; ++ordinal) {
+    record("short", {{"name", "short"}});
+    // So many digits take memory.
+    record("long", {{"name", "long"}, {"time", 1750000000.1234567 + static_cast<double>(ordinal)}});
+    const FailingAllocationsOfOthers failing(ordinal);
+    ASSERT_TRUE(flush()) << ordinal;
+    happened += static_cast<int>(failing.happened());
+  }
+  EXPECT_GT(happened, 10);
+  EXPECT_EQ(askOne(file(), "SELECT count(*) FROM events"), "118");
+  EXPECT_EQ(ask(file(), "SELECT id, payload FROM events WHERE NOT json_valid(payload)"), (std::vector<std::string>{}));
+  EXPECT_EQ(askOne(file(), "SELECT count(*) FROM events WHERE payload ->> '$.name' IS NOT name"), "0");
+}
+
 TEST_F(RecorderShortMemory, TheWriterTriesAgainWhenNothingAtAllIsLeftForAWhile) {
   startSilently();
   record("before");
