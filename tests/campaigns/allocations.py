@@ -50,7 +50,7 @@ class Trials:
         self.context, self.figures = context, figures
         self.control = context.new_control()
         self.environment = self.control.environment(context.shim("allocations"))
-        self.service = context.new_service("", environment=self.environment)
+        self.service = context.new_service(environment=self.environment)
         self.polites = []
         self.trials = 0
 
