@@ -21,7 +21,6 @@ import unittest
 TOOLS = ("mmdebstrap", "systemd-nspawn", "nsenter")
 # What a tree needs to boot and to install the packages; their own dependencies come with them.
 INCLUDED = ("systemd", "systemd-sysv", "dbus")
-MIRROR = "http://deb.debian.org/debian"
 PACKAGES = ("tarnreporting", "tarnreporting-tools", "libtarnreporting1", "python3-tarnreporting")
 STATE = "/var/lib/tarnreporting"
 SECONDS = 120
@@ -115,7 +114,8 @@ class FreshMachine(unittest.TestCase):
         cls.tree = tree
         began = time.monotonic()
         subprocess.run(["mmdebstrap", "--quiet", "--variant=minbase",
-                        "--include=" + ",".join([*INCLUDED, *dependencies()]), "bookworm", tree, options.mirror],
+                        "--include=" + ",".join([*INCLUDED, *dependencies()]), "bookworm", tree,
+                        *([options.mirror] if options.mirror else [])],
                        check=True, stdin=subprocess.DEVNULL)
         print(f"the tree is there after {time.monotonic() - began:.0f} s", flush=True)
         os.mkdir(os.path.join(tree, "packages"))
@@ -223,7 +223,7 @@ class FreshMachine(unittest.TestCase):
 if __name__ == "__main__":
     parser = argparse.ArgumentParser(usage=__doc__)
     parser.add_argument("packages")
-    parser.add_argument("--mirror", default=MIRROR)
+    parser.add_argument("--mirror")
     options = parser.parse_args()
     if reason := why_not():
         print(f"fresh machine: not tried: {reason}")
