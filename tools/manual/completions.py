@@ -103,28 +103,28 @@ def zsh_value(option):
 
 
 def zsh_options(command):
-    specs = []
+    arguments = []
     for option in command["options"]:
         value = zsh_value(option) if "value" in option and not option["value"].startswith("[") else ""
         if option["names"]:
-            specs += [quoted(f"{name}[{zsh_text(option['text'])}]{value}") for name in option["names"]]
+            arguments += [quoted(f"{name}[{zsh_text(option['text'])}]{value}") for name in option["names"]]
         else:
             name = option["positional"].replace(":", "")
-            specs.append(quoted(f":{name}:{'_files' if path_of(option) == 'files' else ''}"))
-    return specs
+            arguments.append(quoted(f":{name}:{'_files' if path_of(option) == 'files' else ''}"))
+    return arguments
 
 
 def zsh_function(words, command, common):
     """The function of a command, after those of the commands below it."""
     below = "".join(zsh_function((*words, inner["name"]), inner, common) for inner in command["commands"])
     name = "_" + "_".join(words)
-    specs = zsh_options(command) + (common if len(words) > 1 else [])
-    specs = [spec for spec in specs if not (command["commands"] and spec.startswith("':"))]
+    arguments = zsh_options(command) + (common if len(words) > 1 else [])
+    arguments = [argument for argument in arguments if not (command["commands"] and argument.startswith("':"))]
     if not command["commands"]:
-        return below + f"{name}() {{\n  _arguments -s \\\n    " + " \\\n    ".join(specs) + "\n}\n"
+        return below + f"{name}() {{\n  _arguments -s \\\n    " + " \\\n    ".join(arguments) + "\n}\n"
     listed = " ".join(quoted(f"{inner['name']}:{first_line(inner['text'])}") for inner in command["commands"])
     cases = "".join(f"    {inner['name']}) {name}_{inner['name']} ;;\n" for inner in command["commands"])
-    shown = " \\\n    ".join([*specs, "'1: :->command'", "'*:: :->rest'"])
+    shown = " \\\n    ".join([*arguments, "'1: :->command'", "'*:: :->rest'"])
     return below + (f"{name}() {{\n  local context state line\n  local -a commands=({listed})\n"
                     f"  _arguments -s -C \\\n    {shown}\n"
                     "  case $state in\n  command) _describe command commands ;;\n  rest)\n    case ${line[1]} in\n"
@@ -132,7 +132,7 @@ def zsh_function(words, command, common):
 
 
 def zsh(program):
-    common = [spec for spec in zsh_options(program) if not spec.startswith(("'-h", "'--help"))]
+    common = [argument for argument in zsh_options(program) if not argument.startswith(("'-h", "'--help"))]
     name = program["name"]
     return f"#compdef {name}\n" + zsh_function((name,), program, common) + f'_{name} "$@"\n'
 
