@@ -8,7 +8,7 @@ import shutil
 import sys
 import time
 
-sys.path.insert(0, os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "adapters", "pipewire", "real"))
+sys.path.insert(0, os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "e2e", "pipewire"))
 from headless import Machine, eventually  # noqa: E402
 
 STREAMS_A_SECOND = 200 / 60

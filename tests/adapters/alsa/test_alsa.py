@@ -9,7 +9,7 @@ import time
 import unittest
 
 HERE = os.path.dirname(os.path.abspath(__file__))
-sys.path.insert(0, os.path.join(HERE, "..", "pipewire", "real"))
+sys.path.insert(0, os.path.join(HERE, "..", "..", "e2e", "pipewire"))
 from headless import Headless, eventually  # noqa: E402
 
 RECORDED = os.path.join(HERE, "..", "..", "host", "drivers", "alsa", "idle")
