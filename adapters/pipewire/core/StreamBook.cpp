@@ -122,6 +122,7 @@ void StreamBook::end(Moment at, std::string_view reason) {
   xruns_.clear();
   unsettled_.clear();
   prepared_.clear();
+  doubtsDefault_ = false;
 }
 
 void StreamBook::settle() {
@@ -200,6 +201,7 @@ void StreamBook::start(Stream& stream, StreamFacts facts) {
   facts.quantum = {};
   stream.quantum = {};
   stream.said = std::move(facts);
+  doubtDefault(stream.said.route);
   actions_.emplace_back(startMessage(occasion(stream, stream.runsSince), stream.said));
 }
 
@@ -231,6 +233,7 @@ void StreamBook::sayChanges(Stream& stream, StreamFacts facts) {
   const bool isOtherQuantum = facts.quantum != said.quantum;
   said = std::move(facts);
   if (isOtherRoute) {
+    doubtDefault(said.route);
     actions_.emplace_back(routeMessage(now, said.route));
   }
   if (isOtherGroup) {

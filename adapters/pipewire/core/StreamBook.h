@@ -69,6 +69,10 @@ class StreamBook {
   void prepare() { prepared_.merge(unsettled_); }
   void settlePrepared();
   bool isSettled() const { return unsettled_.empty() && prepared_.empty(); }
+  // Whether, since the last call, a stream was said to play to or record from what isn't the default. PipeWire's server
+  // tells nobody of a new default any longer once a client that asked for it went before it was answered, so that
+  // whoever looks at the graph then asks for the default anew.
+  bool takeDoubtOfDefault() { return std::exchange(doubtsDefault_, false); }
   // What is to be done since the last call.
   Actions take() { return std::exchange(actions_, {}); }
 
@@ -104,6 +108,7 @@ class StreamBook {
   void start(Stream& stream, StreamFacts facts);
   void stop(Stream& stream, Moment at);
   void sayChanges(Stream& stream, StreamFacts facts);
+  void doubtDefault(const Route& route) { doubtsDefault_ = doubtsDefault_ || (route.count > 0 && !route.isDefault); }
   void endStream(ObjectId node, Moment at, std::string_view reason);
   void follow(Stream& stream, const CycleFacts& cycle, const CycleFacts::Follower& follower, bool driverWasLate);
   void sayOverload(Stream& stream, Moment until);
@@ -118,6 +123,7 @@ class StreamBook {
   std::set<ObjectId> unsettled_, prepared_;
   std::map<ObjectId, std::int64_t> xruns_;  // of the drivers
   StreamNumber lastNumber_ = 0;
+  bool doubtsDefault_ = false;
   Actions actions_;
 };
 

@@ -235,9 +235,13 @@ std::unique_ptr<BoundObject> bindObject(const Binding& binding, ObjectId id, std
     return std::make_unique<BoundDevice>(binding, id);
   }
   if (type == PW_TYPE_INTERFACE_Metadata && textOf(properties, PW_KEY_METADATA_NAME) == "default") {
-    return std::make_unique<BoundMetadata>(binding, id);
+    return bindDefaults(binding, id);
   }
   return nullptr;
+}
+
+std::unique_ptr<BoundObject> bindDefaults(const Binding& binding, ObjectId id) {
+  return std::make_unique<BoundMetadata>(binding, id);
 }
 
 std::unique_ptr<BoundObject> bindProfiler(const Binding& binding, ObjectId id) {

@@ -52,6 +52,8 @@ class BoundObject {
 // The object of a global of the registry; null for one that doesn't concern sound.
 std::unique_ptr<BoundObject> bindObject(const Binding& binding, ObjectId id, std::string_view type,
                                         const Properties& properties);
+// The metadata that tells what is the default.
+std::unique_ptr<BoundObject> bindDefaults(const Binding& binding, ObjectId id);
 // The profiler, as long as it is to tell of cycles.
 std::unique_ptr<BoundObject> bindProfiler(const Binding& binding, ObjectId id);
 

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "adapters/pipewire/graph/GraphWatcher.h"
 
+#include <pipewire/extensions/metadata.h>
 #include <pipewire/extensions/profiler.h>
 #include <pipewire/pipewire.h>
 
@@ -31,6 +32,7 @@ class GraphWatcher::Objects {
   }
   ~Objects() {
     profiler_.reset();
+    metadata_.reset();
     objects_.clear();
     spa_hook_remove(&registryHook_);
     spa_hook_remove(&coreHook_);
@@ -50,12 +52,19 @@ class GraphWatcher::Objects {
     }
     if (auto object = bindObject(self.binding_, id, type, propertiesOf(dictionary))) {
       self.objects_[id] = std::move(object);
+      if (type == std::string_view(PW_TYPE_INTERFACE_Metadata)) {
+        self.metadataId_ = id;
+      }
       self.changed();
     }
   }
   static void removed(void* data, std::uint32_t id) {
     auto& self = *static_cast<Objects*>(data);
     if (self.objects_.erase(id) == 0) return;
+    if (id == self.metadataId_) {
+      self.metadataId_ = SPA_ID_INVALID;
+      self.metadata_.reset();
+    }
     self.book_.removed(id, wallClock());
     self.changed();
   }
@@ -64,6 +73,7 @@ class GraphWatcher::Objects {
     if (id != PW_ID_CORE || !self.isAsked_ || sequence != self.sequence_) return;
     self.isAsked_ = false;
     self.book_.settlePrepared();
+    self.askForDefault();
     const bool isQuiet = !self.hasChanged_;
     self.wasQuiet_ = self.wasQuiet_ || isQuiet;
     if (self.hasChanged_) {
@@ -101,6 +111,16 @@ class GraphWatcher::Objects {
     sequence_ = pw_core_sync(core_, PW_ID_CORE, 0);
     isAsked_ = true;
   }
+  // Who binds the metadata is told all of it; what was bound before goes once that is over, since PipeWire's server
+  // loses count of who is being told when one goes meanwhile.
+  void askForDefault() {
+    if (metadata_) {
+      objects_[metadataId_] = std::move(metadata_);
+    }
+    if (!book_.takeDoubtOfDefault() || metadataId_ == SPA_ID_INVALID) return;
+    metadata_ = bindDefaults(binding_, metadataId_);
+    hasChanged_ = true;
+  }
   // PipeWire tells of its cycles once a second or so, for as long as somebody listens.
   void profile() {
     const bool wants = profiles_ && profilerId_ != SPA_ID_INVALID && book_.anyRuns();
@@ -119,6 +139,8 @@ class GraphWatcher::Objects {
   spa_hook coreHook_{};
   spa_hook registryHook_{};
   std::unordered_map<ObjectId, std::unique_ptr<BoundObject>> objects_;
+  ObjectId metadataId_ = SPA_ID_INVALID;
+  std::unique_ptr<BoundObject> metadata_;  // bound anew, and not all told yet
   ObjectId profilerId_ = SPA_ID_INVALID;
   std::unique_ptr<BoundObject> profiler_;
   int sequence_ = 0;

@@ -1,6 +1,8 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "adapters/pipewire/core/StreamBook.h"
 
+#include <tuple>
+
 #include "tests/adapters/pipewire/StreamBookFixture.h"
 
 namespace tarn::streams {
@@ -222,6 +224,33 @@ TEST_F(PipeWireStreams, ADefaultThatTheStreamDoesNotFollowIsToldAllTheSame) {
   ASSERT_EQ(namesOf(posts), Names{"RouteChange Generic"});
   EXPECT_EQ(textOfField(posts[0], "active_devices"), "speaker");
   EXPECT_EQ(textOfField(posts[0], "device_is_default"), "false");
+}
+
+TEST_F(PipeWireStreams, WhoPlaysToWhatIsNotTheDefaultMakesTheDefaultDoubtful) {
+  book.defaultKnown(1, true, "speaker");
+  addPlayer(at(1));
+  run(at(2));
+  const bool atTheDefault = book.takeDoubtOfDefault();
+  book.removed(60, at(3));
+  book.settle();
+  const bool nowhere = book.takeDoubtOfDefault();
+  book.linkKnown(61, at(3), {kPlayer, kHeadset, false, {}});
+  book.settle();
+  const bool elsewhere = book.takeDoubtOfDefault();
+  EXPECT_EQ(std::tuple(atTheDefault, nowhere, elsewhere, book.takeDoubtOfDefault()),
+            std::tuple(false, false, true, false));
+}
+
+TEST_F(PipeWireStreams, ARunThatBeginsElsewhereMakesTheDefaultDoubtfulUntilPipeWireGoes) {
+  book.defaultKnown(1, true, "headset");
+  addPlayer(at(1));
+  EXPECT_FALSE(book.takeDoubtOfDefault());
+  run(at(2));
+  EXPECT_TRUE(book.takeDoubtOfDefault());
+  pause(at(3));
+  run(at(4));
+  book.end(at(5), "gone");
+  EXPECT_FALSE(book.takeDoubtOfDefault());
 }
 
 TEST_F(PipeWireStreams, ADevicesVolumeIsToldBesideTheStreams) {
