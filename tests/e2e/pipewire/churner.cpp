@@ -3,9 +3,12 @@
 //
 //   churner SECONDS               as fast as they can, each once sound has flowed in it: as fast as they are linked
 //   churner SECONDS bare RATE     so many a second, which nobody links: each is seen and gone
-//   churner SECONDS pause RATE    streams that stay, of which one starts and one stops so many times a second
+//   churner SECONDS link RATE     so many a second, which link themselves to the sink, faster than a session manager
+//   does churner SECONDS pause RATE    streams that stay, of which one starts and one stops so many times a second
 //
-// It prints how many there were; of those that stay, how many times one started.
+// It prints how many there were, and of those that link themselves in how many sound flowed; of those that stay, how
+// many times one started.
+#include <pipewire/filter.h>
 #include <pipewire/pipewire.h>
 #include <spa/param/audio/format-utils.h>
 
@@ -17,15 +20,18 @@
 
 namespace {
 
-constexpr std::size_t kAtOnce = 8;
+constexpr std::size_t kAtOnce = 16;
 
-enum class Way { Linked, Bare, Pause };
+enum class Way { Linked, Bare, Link, Pause };
 
 struct Churner;
 
 struct Slot {
   Churner* churner = nullptr;
   pw_stream* stream = nullptr;
+  // Of those that link themselves: a filter has its port without a session manager.
+  pw_filter* filter = nullptr;
+  pw_proxy* link = nullptr;
   spa_hook hook{};
   bool isOver = false;
   bool isPaused = false;
@@ -37,9 +43,12 @@ struct Churner {
   spa_source* turn = nullptr;
   std::array<Slot, kAtOnce> slots;
   Way way = Way::Linked;
+  std::string sink;
+  std::string sinkPort;
   std::size_t next = 0;
   unsigned long started = 0;
   unsigned long over = 0;
+  unsigned long heard = 0;
 };
 
 void stateChanged(void* data, pw_stream_state, pw_stream_state state, const char*) {
@@ -72,9 +81,56 @@ void begin(Churner& churner, Slot& slot) {
                     static_cast<pw_stream_flags>(linked | PW_STREAM_FLAG_MAP_BUFFERS), params, 1);
 }
 
+// A beat after it began at the earliest: the server knows its node before its port.
+void linkOnce(Slot& slot) {
+  if (slot.link != nullptr || pw_filter_get_node_id(slot.filter) == SPA_ID_INVALID) return;
+  const std::string node = std::to_string(pw_filter_get_node_id(slot.filter));
+  pw_properties* const ends =
+      pw_properties_new(PW_KEY_LINK_OUTPUT_NODE, node.c_str(), PW_KEY_LINK_INPUT_NODE, slot.churner->sink.c_str(),
+                        PW_KEY_LINK_INPUT_PORT, slot.churner->sinkPort.c_str(), nullptr);
+  slot.link = static_cast<pw_proxy*>(pw_core_create_object(slot.churner->core, "link-factory", PW_TYPE_INTERFACE_Link,
+                                                           PW_VERSION_LINK, &ends->dict, 0));
+  pw_properties_free(ends);
+}
+
+void filterChanged(void* data, pw_filter_state, pw_filter_state state, const char*) {
+  auto& slot = *static_cast<Slot*>(data);
+  if (state != PW_FILTER_STATE_STREAMING || slot.isOver) return;
+  slot.isOver = true;
+  ++slot.churner->heard;
+}
+
+void beginFilter(Churner& churner, Slot& slot) {
+  static constexpr pw_filter_events kEvents{.version = PW_VERSION_FILTER_EVENTS, .state_changed = &filterChanged};
+  const std::string name = "churn" + std::to_string(churner.started++);
+  slot.isOver = false;
+  slot.filter = pw_filter_new(churner.core, name.c_str(),
+                              pw_properties_new(PW_KEY_MEDIA_CLASS, "Stream/Output/Audio", PW_KEY_MEDIA_TYPE, "Audio",
+                                                PW_KEY_MEDIA_ROLE, "Game", PW_KEY_APP_ID, "org.test.churn", nullptr));
+  pw_filter_add_listener(slot.filter, &slot.hook, &kEvents, &slot);
+  pw_filter_add_port(
+      slot.filter, PW_DIRECTION_OUTPUT, PW_FILTER_PORT_FLAG_MAP_BUFFERS, 0,
+      pw_properties_new(PW_KEY_FORMAT_DSP, "32 bit float mono audio", PW_KEY_PORT_NAME, "output", nullptr), nullptr, 0);
+  pw_filter_connect(slot.filter, PW_FILTER_FLAG_NONE, nullptr, 0);
+}
+
+void endFilter(Slot& slot) {
+  if (slot.link != nullptr) pw_core_destroy(slot.churner->core, slot.link);
+  slot.link = nullptr;
+  pw_filter_destroy(slot.filter);
+}
+
 // One of those that come and go by the clock.
 void beatOnce(Churner& churner) {
   Slot& slot = churner.slots[churner.next++ % kAtOnce];
+  if (churner.way == Way::Link) {
+    for (Slot& begun : churner.slots)
+      linkOnce(begun);
+    endFilter(slot);
+    ++churner.over;
+    beginFilter(churner, slot);
+    return;
+  }
   if (churner.way == Way::Bare) {
     pw_stream_destroy(slot.stream);
     ++churner.over;
@@ -116,6 +172,36 @@ void end(void* data, std::uint64_t) {
   pw_main_loop_quit(static_cast<Churner*>(data)->loop);
 }
 
+std::string_view word(const spa_dict* words, const char* key) {
+  const char* const text = words == nullptr ? nullptr : spa_dict_lookup(words, key);
+  return text == nullptr ? std::string_view() : text;
+}
+
+// The first sink there is, and the first port into it, which is told after it.
+void seen(void* data, std::uint32_t id, std::uint32_t, const char*, std::uint32_t, const spa_dict* words) {
+  auto& churner = *static_cast<Churner*>(data);
+  if (churner.sink.empty() && word(words, PW_KEY_MEDIA_CLASS) == "Audio/Sink") churner.sink = std::to_string(id);
+  if (churner.sink.empty() || word(words, PW_KEY_NODE_ID) != churner.sink) return;
+  if (word(words, PW_KEY_PORT_DIRECTION) != "in" || !churner.sinkPort.empty()) return;
+  churner.sinkPort = std::to_string(id);
+  pw_main_loop_quit(churner.loop);
+}
+
+void findSink(Churner& churner) {
+  static constexpr pw_registry_events kEvents{.version = PW_VERSION_REGISTRY_EVENTS, .global = &seen};
+  pw_registry* const registry = pw_core_get_registry(churner.core, PW_VERSION_REGISTRY, 0);
+  spa_hook hook{};
+  pw_registry_add_listener(registry, &hook, &kEvents, &churner);
+  pw_main_loop_run(churner.loop);
+  spa_hook_remove(&hook);
+  pw_proxy_destroy(reinterpret_cast<pw_proxy*>(registry));
+}
+
+Way wayOf(std::string_view word) {
+  if (word == "bare") return Way::Bare;
+  return word == "link" ? Way::Link : Way::Pause;
+}
+
 }  // namespace
 
 int main(int count, char** words) {
@@ -127,13 +213,12 @@ int main(int count, char** words) {
   pw_context* const context = pw_context_new(loop, nullptr, 0);
   churner.core = pw_context_connect(context, nullptr, 0);
   if (churner.core == nullptr) return 1;
-  if (count == 4) {
-    churner.way = words[2] == std::string_view("bare") ? Way::Bare : Way::Pause;
-  }
+  if (count == 4) churner.way = wayOf(words[2]);
+  if (churner.way == Way::Link) findSink(churner);
   churner.turn = pw_loop_add_event(loop, &turn, &churner);
   for (Slot& slot : churner.slots) {
     slot.churner = &churner;
-    begin(churner, slot);
+    churner.way == Way::Link ? beginFilter(churner, slot) : begin(churner, slot);
   }
   if (churner.way != Way::Linked) {
     startBeat(churner, std::stod(words[3]));
@@ -142,7 +227,9 @@ int main(int count, char** words) {
   timespec due{std::stol(words[1]), 0};
   pw_loop_update_timer(loop, timer, &due, nullptr, false);
   pw_main_loop_run(churner.loop);
-  std::printf("%lu\n", churner.over);
+  std::printf("%lu", churner.over);
+  if (churner.way == Way::Link) std::printf(" %lu", churner.heard);
+  std::printf("\n");
   pw_context_destroy(context);
   pw_main_loop_destroy(churner.loop);
   pw_deinit();

@@ -43,7 +43,10 @@ def measure(machine, name, seconds, work=time.sleep):
     streams = work(seconds)
     took = time.monotonic() - before[2]
     used = seconds_of(pid) - before[0]
-    rate = f", {streams / took:.0f} streams a second, {used / streams * 1e6:.0f} us each" if streams else ""
+    rate = ""
+    if streams:
+        heard = f" (sound in {streams[1] / took:.0f})" if len(streams) > 1 else ""
+        rate = f", {streams[0] / took:.0f} streams a second{heard}, {used / streams[0] * 1e6:.0f} us each"
     print(f"{name}: {used / took * 100:.3f} % of a core, {(switches(pid) - before[1]) / took:.1f} wake-ups a second, "
           f"{memory(pid) / 1024:.1f} MiB at the most{rate}", flush=True)
 
@@ -54,7 +57,7 @@ def churn(machine, streamer, *words):
         churner = streamer.replace("streamer", "churner")
         answer = subprocess.run([churner, str(seconds), *words], env=machine.environment, text=True, check=True,
                                 stdout=subprocess.PIPE, stdin=subprocess.DEVNULL)
-        return int(answer.stdout.split()[-1])
+        return [int(word) for word in answer.stdout.split()]
     return work
 
 
@@ -75,6 +78,7 @@ def main(programs, streamer, seconds=10):
             measure(machine, f"{IDLE_STREAMS} streams that play, {kind}", seconds)
             measure(machine, f"streams that come and go, {kind}", seconds, churn(machine, streamer))
             measure(machine, f"that nobody links, {kind}", seconds, churn(machine, streamer, "bare", str(RATE)))
+            measure(machine, f"that link themselves, {kind}", seconds, churn(machine, streamer, "link", str(RATE)))
             measure(machine, f"that start and stop, {kind}", seconds, churn(machine, streamer, "pause", str(RATE)))
         finally:
             machine.close()
