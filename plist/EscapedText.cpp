@@ -70,29 +70,48 @@ bool isPlain(char character) {
   return character >= 0x20 && character < 0x7F;
 }
 
+// Texts are looked at by words of eight characters, in whatever order they lie in them: whether any of the eight is of
+// a kind. A borrow only ever comes from a character that is of the kind itself.
+constexpr std::uint64_t kOnes = 0x0101010101010101;
+constexpr std::uint64_t kHighest = 0x80 * kOnes;
+constexpr std::size_t kWord = sizeof(std::uint64_t);
+
+std::uint64_t wordAt(std::string_view text, std::size_t at) {
+  std::uint64_t eight = 0;
+  std::memcpy(&eight, text.data() + at, kWord);
+  return eight;
+}
+
+std::uint64_t below(std::uint64_t eight, std::uint64_t limit) {
+  return (eight - limit * kOnes) & ~eight & kHighest;
+}
+
+bool anyIsUnusual(std::uint64_t eight) {
+  return ((eight & kHighest) | below(eight, 0x20) | below(eight ^ 0x7F * kOnes, 1)) != 0;
+}
+
+// How many plain characters a text begins with.
+std::size_t plainLength(std::string_view text) {
+  std::size_t length = 0;
+  while (text.size() - length >= kWord && !anyIsUnusual(wordAt(text, length))) {
+    length += kWord;
+  }
+  while (length < text.size() && isPlain(text[length])) {
+    ++length;
+  }
+  return length;
+}
+
 bool needsJsonEscape(char character) {
   return isControl(character) || character == '"' || character == '\\';
 }
 
-// The same of any of eight characters, in whatever order they lie in the word. A borrow only ever comes from a
-// character that needs an escape itself.
 bool anyNeedsJsonEscape(std::uint64_t eight) {
-  constexpr std::uint64_t kOnes = 0x0101010101010101;
-  constexpr std::uint64_t kHighest = 0x80 * kOnes;
-  const auto below = [](std::uint64_t characters, std::uint64_t limit) {
-    return (characters - limit * kOnes) & ~characters & kHighest;
-  };
   return (below(eight, 0x20) | below(eight ^ '"' * kOnes, 1) | below(eight ^ '\\' * kOnes, 1)) != 0;
 }
 
-// Nearly all keys and most texts are, so they are looked at by words. The last one overlaps the one before.
+// Nearly all keys and most texts are. The last word overlaps the one before.
 bool isPlainJson(std::string_view text) {
-  constexpr std::size_t kWord = sizeof(std::uint64_t);
-  const auto isPlainWord = [text](std::size_t at) {
-    std::uint64_t eight = 0;
-    std::memcpy(&eight, text.data() + at, kWord);
-    return !anyNeedsJsonEscape(eight);
-  };
   if (text.size() < kWord) {
     for (const char character : text) {
       if (needsJsonEscape(character)) return false;
@@ -100,9 +119,9 @@ bool isPlainJson(std::string_view text) {
     return true;
   }
   for (std::size_t at = 0; at + kWord < text.size(); at += kWord) {
-    if (!isPlainWord(at)) return false;
+    if (anyNeedsJsonEscape(wordAt(text, at))) return false;
   }
-  return isPlainWord(text.size() - kWord);
+  return !anyNeedsJsonEscape(wordAt(text, text.size() - kWord));
 }
 
 template <class NeedsEscape, class AppendEscape>
@@ -126,10 +145,7 @@ void appendEscapedControls(std::string& out, std::string_view text) {
 
 void appendPrintable(std::string& out, std::string_view text, LineEnds lineEnds) {
   while (!text.empty()) {
-    std::size_t plain = 0;
-    while (plain < text.size() && isPlain(text[plain])) {
-      ++plain;
-    }
+    const std::size_t plain = plainLength(text);
     out.append(text.substr(0, plain));
     text.remove_prefix(plain);
     if (text.empty()) return;

@@ -105,6 +105,21 @@ TEST_F(SessionOverviewTest, ASummaryCountsForAllBeforeIt) {
   EXPECT_EQ(overviews().front().overloads, 8);
 }
 
+TEST_F(SessionOverviewTest, ASummaryCountsHoweverManyEventsOfOthersCameAfterIt) {
+  add(1, 1300, "stopped");
+  add(2);
+  addOverload(1);
+  addSummary(1, 7);
+  for (int i = 0; i < 300; ++i) {
+    addEvent(2, 1600, "rtc", "flush", "{}");
+  }
+  addPeriod(1, 1000, 1300, 1, addMessage(1, 1600, "Playback.Generic", "{}"));
+  addPeriod(2, 1000, 0, 7);
+  const auto all = overviews();
+  EXPECT_EQ(all[0].overloads, 7);
+  EXPECT_EQ(all[1].overloads, 0);
+}
+
 TEST_F(SessionOverviewTest, TheLastSummaryOfOneThatEndedCountsForAll) {
   add(1, 1300, "stopped");
   addOverload(1);

@@ -72,7 +72,7 @@ class SessionStoreFixture : public ::testing::Test {
         " INSERT INTO event_texts VALUES(2 * new.id, NULL, NULL, new.payload),"
         "  (2 * new.id + 1, new.backend, new.name, new.detail);"
         " INSERT INTO event_rows VALUES(new.id, new.time, 0, 0, NULL, new.session);"
-        " INSERT INTO session_spans SELECT new.session, new.id WHERE new.session IS NOT NULL;"
+        " INSERT OR IGNORE INTO session_spans SELECT new.session, new.id & -256 WHERE new.session IS NOT NULL;"
         "END;"
         "INSERT INTO runs VALUES(1, 'boot', '0.1.0', 1795150000, NULL, NULL);");
   }

@@ -2,9 +2,15 @@
 // The text forms that everything else is put together from: bytes in hexadecimal, moments in UTC.
 #include <gtest/gtest.h>
 
+#include <cstdint>
+#include <random>
+#include <string>
+#include <string_view>
+
 #include "plist/CalendarDate.h"
 #include "plist/EscapedText.h"
 #include "plist/Hex.h"
+#include "tests/support/Seeds.h"
 
 namespace tarn::plist {
 namespace {
@@ -58,6 +64,52 @@ TEST(Printable, LineEndsAreAsAskedFor) {
   EXPECT_EQ(printable("a\n\nb\r\n"), "a\\u000a\\u000ab\\u000d\\u000a");
   EXPECT_EQ(printable("a\n\nb\r\n", LineEnds::Indented), "a\n\t\n\tb\\u000d\n\t");
   EXPECT_EQ(printable("a\n\nb\r\n", LineEnds::Kept), "a\n\nb\\u000d\n");
+}
+
+// The same, one character after the other.
+std::string printableOneByOne(std::string_view text) {
+  std::string shown;
+  while (!text.empty()) {
+    std::size_t length = 1;
+    while (length < text.size() && (static_cast<unsigned char>(text[length]) & 0xC0U) == 0x80) {
+      ++length;
+    }
+    const bool isPlain = length == 1 && text[0] >= 0x20 && text[0] < 0x7F;
+    shown += isPlain ? std::string(text.substr(0, 1)) : printable(text.substr(0, length));
+    text.remove_prefix(length);
+  }
+  return shown;
+}
+
+TEST(Printable, EveryByteAtEveryPlaceOfALongText) {
+  for (std::size_t length = 1; length < 20; ++length) {
+    for (std::size_t at = 0; at < length; ++at) {
+      for (int byte = 0; byte < 256; ++byte) {
+        std::string text(length, ' ');
+        text[at] = static_cast<char>(byte);
+        ASSERT_EQ(printable(text), printableOneByOne(text)) << byte << " at " << at << " of " << length;
+      }
+    }
+  }
+}
+
+TEST(Printable, LongTextsAreAsTheirCharactersAre) {
+  for (const std::uint64_t seed : testing::testSeeds(1)) {
+    SCOPED_TRACE(testing::seedNote(seed));
+    std::mt19937 random(seed);
+    for (int round = 0; round < 20'000; ++round) {
+      // Mostly plain characters, and those beside the bounds.
+      constexpr std::string_view kBeside("\0\x01\x1f\x20\x21\"\\\x7e\x7f\x80\xa0\xc2\xe2\xff\n", 15);
+      const auto unusualIn = std::uniform_int_distribution<int>(1, 40)(random);
+      std::string text(std::uniform_int_distribution<std::size_t>(0, 70)(random), ' ');
+      for (char& character : text) {
+        const bool isUnusual = std::uniform_int_distribution<int>(0, unusualIn)(random) == 0;
+        character = isUnusual ? kBeside[std::uniform_int_distribution<std::size_t>(0, kBeside.size() - 1)(random)]
+                              : static_cast<char>(std::uniform_int_distribution<int>(0x20, 0x7E)(random));
+      }
+      ASSERT_EQ(printable(text), printableOneByOne(text));
+    }
+  }
 }
 
 TEST(CalendarDate, MomentsOfTheYears1To9999HaveOne) {

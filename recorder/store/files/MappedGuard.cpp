@@ -10,6 +10,8 @@
 #include <csignal>
 #include <mutex>
 
+#include "recorder/store/files/SqliteStart.h"
+
 namespace tarn::recorder {
 
 namespace {
@@ -102,7 +104,7 @@ void MappedGuard::forget(void* memory) noexcept {
 void MappedGuard::guardSqlite() noexcept {
   static std::once_flag once;
   std::call_once(once, [] {
-    sqlite3_initialize();
+    startSqlite();
     sqlite3_vfs* const files = sqlite3_vfs_find("unix");
     if (files == nullptr || files->xSetSystemCall == nullptr) return;
     files->xSetSystemCall(files, "mmap", reinterpret_cast<sqlite3_syscall_ptr>(mapForSqlite));

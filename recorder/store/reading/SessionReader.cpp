@@ -7,6 +7,9 @@
 #include <string_view>
 #include <utility>
 
+#include "recorder/store/StoreViews.h"
+#include "recorder/store/rows/EventTable.h"
+
 namespace tarn::recorder {
 
 namespace {
@@ -15,9 +18,14 @@ constexpr const char* kSessionColumns =
     "SELECT id, run, reporter, connection, pid, uid, process, application, service_type, service_name, created, ended,"
     " end_reason FROM sessions";
 
-// Ids that newest() looks at first, and how many times more then.
-constexpr std::int64_t kFirstReach = 32;
-constexpr std::int64_t kReachFactor = 16;
+// The last event of session ?1 with name ?2 between the ids ?3 and ?4: span by span from the last one, and from the end
+// of each. The view `events` would be asked span by span from the front.
+constexpr std::string_view kNewestId =
+    "SELECT e.id FROM session_spans AS s CROSS JOIN event_rows AS e CROSS JOIN event_texts AS n"
+    " WHERE s.session = ?1 AND s.first > ?3 - 256 AND s.first <= ?4"
+    " AND e.id >= max(s.first, ?3) AND e.id <= min(s.first + 255, ?4) AND e.session = ?1"
+    " AND n.id = 2 * (e.id - e.kind) + 1 AND n.name = ?2 ORDER BY s.first DESC, e.id DESC LIMIT 1";
+static_assert(EventTable::kReach == 256);
 
 std::optional<double> realOf(const Statement& row, int column) {
   return row.isNull(column) ? std::nullopt : std::optional(row.real(column));
@@ -165,28 +173,23 @@ Result<std::vector<RepeatedRow>> SessionReader::repeated(std::int64_t session) {
 
 Result<std::optional<EventRow>> SessionReader::newest(std::int64_t session, const std::string& name, std::int64_t first,
                                                       std::int64_t last) {
+  static const std::string sql = std::string(kSelectEvents).append(" WHERE r.id = (").append(kNewestId).append(")");
   Result<std::optional<EventRow>> found;
-  // Further and further back: what is looked for is near the end as a rule, and there is no index of names.
-  for (std::int64_t reach = kFirstReach; found.ok() && !found.value && last >= first; reach *= kReachFactor) {
-    const std::int64_t from = last - first >= reach ? last - reach + 1 : first;
-    found.error = answer(
-        "SELECT id, time, backend, name, payload, detail, session FROM events"
-        " WHERE id >= ?1 AND id <= ?2 AND session = ?3 AND name = ?4 ORDER BY id DESC LIMIT 1",
-        [&](Statement& statement) {
-          statement.bind(1, from).bind(2, last).bind(3, session).bind(4, std::string_view(name));
-        },
-        [&](const Statement& row) {
-          found.value = EventRow{row.integer(0),
-                                 row.real(1),
-                                 std::string(row.text(2)),
-                                 std::string(row.text(3)),
-                                 std::string(row.text(4)),
-                                 std::string(row.text(5)),
-                                 row.integer(6)};
-          return false;
-        });
-    last = from - 1;
-  }
+  found.error = answer(
+      sql,
+      [&](Statement& statement) {
+        statement.bind(1, session).bind(2, std::string_view(name)).bind(3, first).bind(4, last);
+      },
+      [&](const Statement& row) {
+        found.value = EventRow{row.integer(0),
+                               row.real(1),
+                               std::string(row.text(2)),
+                               std::string(row.text(3)),
+                               std::string(row.text(4)),
+                               std::string(row.text(5)),
+                               row.integer(6)};
+        return false;
+      });
   return found;
 }
 

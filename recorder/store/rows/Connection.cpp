@@ -7,12 +7,14 @@
 #include <utility>
 
 #include "plist/Hex.h"
+#include "recorder/store/files/SqliteStart.h"
 #include "recorder/store/rows/Statement.h"
 
 namespace tarn::recorder {
 
 int Connection::open(const std::string& name, int flags) {
   close();
+  startSqlite();
   const int code = sqlite3_open_v2(name.c_str(), &database_, flags | SQLITE_OPEN_NOMUTEX, nullptr);
   if (database_ != nullptr) {
     sqlite3_extended_result_codes(database_, 1);

@@ -137,6 +137,29 @@ TEST_F(SessionReaderTest, TheNewestEventOfANameIsFoundHoweverFarBack) {
   EXPECT_EQ(at(5, 4), "none");
 }
 
+TEST_F(SessionReaderTest, TheNewestEventIsThatOfTheLastSpanWhichHasOne) {
+  for (int i = 1; i <= 1100; ++i) {
+    const bool isOfOne = i == 10 || i == 255 || i == 256 || i == 300 || i == 900;
+    addEvent(isOfOne ? 1 : 2, i, "tally", i == 900 ? "other" : "n", "{}");
+  }
+  addEvent(0, 1101, "tally", "n", "{}");
+  SessionReader reader(file());
+  ASSERT_TRUE(reader.open().ok());
+  const auto newest = [&reader](std::int64_t session, std::int64_t first, std::int64_t last) {
+    const auto row = reader.newest(session, "n", first, last);
+    EXPECT_TRUE(row.ok()) << row.error.text();
+    return row.value ? row.value->id : 0;
+  };
+  EXPECT_EQ(newest(1, 1, 1101), 300);
+  EXPECT_EQ(newest(1, 1, 299), 256);
+  EXPECT_EQ(newest(1, 1, 255), 255);
+  EXPECT_EQ(newest(1, 254, 255), 255);
+  EXPECT_EQ(newest(1, 10, 254), 10);
+  EXPECT_EQ(newest(1, 11, 254), 0);
+  EXPECT_EQ(newest(2, 1, 1101), 1100);
+  EXPECT_EQ(newest(3, 1, 1101), 0);
+}
+
 TEST_F(SessionReaderTest, PeriodsOfSeveralSessions) {
   addPeriod(2, 20, 30);
   addPeriod(1, 10, 15);
@@ -219,9 +242,9 @@ TEST_F(SessionReaderViewTest, ReadsEventsThatAreAView) {
 
 TEST_F(SessionReaderViewTest, AViewThatNeverEndsIsGivenUp) {
   makeStore();
-  sql("DROP VIEW events; CREATE VIEW events AS WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n)"
-      " SELECT i AS id, 0 AS time, 'tally' AS backend, 'n' || i % 2 AS name, '' AS payload, '' AS detail,"
-      " i % 2 + 5 AS session FROM n;");
+  addEvent(1, 1, "tally", "n", "{}");
+  sql("DROP TABLE event_rows; CREATE VIEW event_rows AS WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n)"
+      " SELECT i AS id, 0 AS time, 0 AS kind, 0 AS payload, NULL AS cut, i % 2 + 5 AS session FROM n;");
   SessionReader reader(file());
   ASSERT_TRUE(reader.open().ok());
   EXPECT_EQ(reader.newest(1, "n", 1, 2).error.text(), file().string() + ": its tables lead into themselves");
