@@ -97,7 +97,7 @@ int run(int argumentCount, char** arguments) {
   LinuxPlatform platform(setup.configuration, command.options->stateDirectory, setup.deviceProperties,
                          {setup.clock, *setup.log, serviceManager, [&setup] { setup.settleLog(); },
                           [&setup] { return setup.readConfiguration(); },
-                          [&setup](platform::LogLevel level) { setup.setLogLevel(level); }});
+                          [&setup](platform::LogLevel level) { setup.setLogLevel(level); }, &setup.sessionIds});
   int status = kExitFailure;
   try {
     status = serve(platform, setup);
