@@ -71,7 +71,7 @@ Status HostSetup::prepare(const ServiceOptions& options) {
   }
   Result<std::unique_ptr<QueuedLog>> opening =
       openLog(options.logTarget, configuration.logLevel, clock, JournalOutput::kSocket,
-              []() noexcept { return WorkOwner::current(); });
+              [this] { return sessionIds.of(WorkOwner::current()); });
   if (opening.failed()) return Error{kExitFailure, opening.error->text};
   queuedLog_ = std::move(opening.value);
   log = std::make_unique<LogFloodGuard>(*queuedLog_, clock);

@@ -11,6 +11,7 @@
 #include <memory>
 
 #include "host/log/LogFloodGuard.h"
+#include "host/log/LogSessionIds.h"
 #include "host/log/QueuedLog.h"
 #include "host/loop/SignalSource.h"
 #include "host/machine/LinuxClock.h"
@@ -51,6 +52,8 @@ class HostSetup {
   // Handed over, or claimed and not bound yet; the platform takes it.
   ListenSocket socket;
   LinuxClock clock;
+  // By what the log names sessions; the platform says where they go on from.
+  LogSessionIds sessionIds;
   // The guard against floods, in front of the queue.
   std::unique_ptr<LogFloodGuard> log;
 

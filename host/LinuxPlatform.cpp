@@ -144,6 +144,12 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
       facilities_(facilitiesOf()) {
   // What comes in is held up while what it becomes piles up.
   recorder_.setRoomHandler([this] { connections_.resumeRequests(); });
+  if (LogSessionIds* const ids = ground.sessionIds; ids != nullptr) {
+    recorder_.setRunHandler([ids](std::int64_t lastSession) { ids->goOnFrom(lastSession); });
+    if (!recorderEnabled_) {
+      ids->goOnFrom(0);
+    }
+  }
   workQueues_.setRoomHandler([this] { connections_.resumeRequests(); });
   connections_.rings.setCommitSource([this] {
     const recorder::RecorderCounters counters = recorder_.counters();
@@ -174,6 +180,8 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
 
 platform::Facilities LinuxPlatform::facilitiesOf() {
   const auto standIn = [this](auto& service) { return recorderEnabled_ ? &service : nullptr; };
+  platform::SessionRecords* const records =
+      recorderEnabled_ ? static_cast<platform::SessionRecords*>(&sessionRecords_) : &countedSessions_;
   platform::TallyService& tally = recorderEnabled_ ? static_cast<platform::TallyService&>(tally_) : noTally_;
   return platform::Facilities{.clock = clock_,
                               .workQueues = workQueues_,
@@ -203,7 +211,7 @@ platform::Facilities LinuxPlatform::facilitiesOf() {
                               .perfDataWriters = &perfDataWriters_,
                               .signposts = &signposts_,
                               .overflow = &overflow_,
-                              .sessionRecords = standIn(sessionRecords_)};
+                              .sessionRecords = records};
 }
 
 Status LinuxPlatform::start() {

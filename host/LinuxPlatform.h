@@ -19,11 +19,13 @@
 #include <vector>
 
 #include "host/ConfigurationReload.h"
+#include "host/CountedSessions.h"
 #include "host/NoTallyService.h"
 #include "host/StatusLine.h"
 #include "host/drivers/AlsaFlume.h"
 #include "host/drivers/FlumeFiles.h"
 #include "host/drivers/LinuxFlumeService.h"
+#include "host/log/LogSessionIds.h"
 #include "host/loop/Deadline.h"
 #include "host/loop/LinuxConditions.h"
 #include "host/loop/LinuxWorkQueues.h"
@@ -80,6 +82,7 @@ class LinuxPlatform final : private platform::ProcessControl {
     platform::UniqueFunction<void()> settleLog = {};  // the last thing before the process ends
     ConfigurationReload::Read readConfiguration = {};
     platform::UniqueFunction<void(platform::LogLevel)> setLogLevel = {};
+    LogSessionIds* sessionIds = nullptr;  // told where the ids of sessions go on from, when there is one
   };
 
   // Makes the parts and puts them together: no thread, no file and no client yet. The limit of open descriptors is
@@ -168,6 +171,7 @@ class LinuxPlatform final : private platform::ProcessControl {
   recorder::RecorderTattleService tattle_;
   recorder::RecorderGyreService gyre_;
   recorder::RecorderSessionRecords sessionRecords_;
+  CountedSessions countedSessions_;
   // The facilities that are the machine's own.
   LinuxConditions conditions_;
   JsonDefaultsStore defaults_;

@@ -77,8 +77,12 @@ Status EventWriter::openOnce() {
     if (auto error = carryOver(); error.failed()) return error;
   }
   if (file_.hasBegunRun()) return {};
-  return file_.beginRun({options_.boot.empty() ? RecorderTime::currentBoot() : options_.boot, options_.version,
-                         started_, options_.machine});
+  Status begun = file_.beginRun({options_.boot.empty() ? RecorderTime::currentBoot() : options_.boot, options_.version,
+                                 started_, options_.machine});
+  if (begun.ok() && runHandler_) {
+    runHandler_(file_.lastSessionBefore());
+  }
+  return begun;
 }
 
 // A run whose end can't be noted counts as one that was killed.

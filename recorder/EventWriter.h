@@ -26,6 +26,7 @@
 
 #include "platform/Clock.h"
 #include "platform/Log.h"
+#include "platform/UniqueFunction.h"
 #include "plist/Result.h"
 #include "recorder/CommitPace.h"
 #include "recorder/NewestMessages.h"
@@ -45,6 +46,10 @@ class EventWriter {
   EventWriter(const EventWriter&) = delete;
   EventWriter& operator=(const EventWriter&) = delete;
 
+  // Told the greatest session id of the runs before, each time this run is found or noted in the file: an id is that
+  // and the session's number. Before open().
+  using RunHandler = platform::UniqueFunction<void(std::int64_t)>;
+  void setRunHandler(RunHandler handler) { runHandler_ = std::move(handler); }
   // Keeps as much and for as long as these options say, from the next maintain() on; the rest of them isn't looked at.
   void setRetention(const RecorderOptions& options);
 
@@ -125,6 +130,7 @@ class EventWriter {
   StateUsage usage_;
   FileAges ages_;  // of that
   CommitPace pace_;
+  RunHandler runHandler_;
   NewestMessages newest_;          // while repeated ones are marked
   plist::Dictionary lastPayload_;  // whose text payloadText_ is
   std::string payloadText_ = "{}";

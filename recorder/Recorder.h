@@ -69,6 +69,8 @@ class Recorder {
 
   // Called on the writer thread each time isFull() or isCrowded() has become false again. Set before start().
   void setRoomHandler(RoomHandler handler) { roomHandler_ = std::move(handler); }
+  // As EventWriter says; called on the writer thread. Set before start().
+  void setRunHandler(EventWriter::RunHandler handler) { writer_.setRunHandler(std::move(handler)); }
   // Maps the counts and makes the writer thread, which opens the file. Called once; what was recorded before is written
   // then.
   void start();
@@ -205,10 +207,9 @@ class Recorder {
   // Of the oldest event that waits, in the steady clock's ticks; 0 when none does.
   std::atomic<TimePoint::rep> oldestSince_{0};
   mutable Mutex mutex_;
-  ConditionVariable work_;  // for the writer thread
-  ConditionVariable done_;  // for those who wait for it
-  // Since the group that is being written was taken.
-  EventBatch incoming_ TARN_GUARDED_BY(mutex_);
+  ConditionVariable work_;                       // for the writer thread
+  ConditionVariable done_;                       // for those who wait for it
+  EventBatch incoming_ TARN_GUARDED_BY(mutex_);  // since the group that is being written was taken
   TimePoint incomingSince_ TARN_GUARDED_BY(mutex_);
   // As EventBatch counts them, of both batches.
   std::size_t waitingBytes_ TARN_GUARDED_BY(mutex_) = 0;
@@ -218,8 +219,7 @@ class Recorder {
   std::uint64_t withoutMemory_ TARN_GUARDED_BY(mutex_) = 0;  // of these
   std::uint64_t expired_ TARN_GUARDED_BY(mutex_) = 0;
   std::uint64_t lostBefore_ TARN_GUARDED_BY(mutex_) = 0;
-  // Notes, which the counters don't count.
-  std::uint64_t notes_ TARN_GUARDED_BY(mutex_) = 0;
+  std::uint64_t notes_ TARN_GUARDED_BY(mutex_) = 0;  // which the counters don't count
   std::uint64_t notesDone_ TARN_GUARDED_BY(mutex_) = 0;
   std::uint64_t awaitedNotes_ TARN_GUARDED_BY(mutex_) = 0;
   bool notesLost_ TARN_GUARDED_BY(mutex_) = false;  // at a shutdown

@@ -9,10 +9,12 @@
 #include <memory>
 #include <string>
 #include <utility>
+#include <vector>
 
 #include "derived/TarnReportingSystemMonitor.h"
 #include "host/HostSetup.h"
 #include "host/LinuxPlatform.h"
+#include "host/check/Check.h"
 #include "host/log/PrefixedLog.h"
 #include "host/loop/ServiceManager.h"
 #include "host/loop/SignalSource.h"
@@ -83,6 +85,15 @@ int serve(LinuxPlatform& platform, HostSetup& setup) {
   return kExitSuccess;
 }
 
+int check(const ServiceOptions& options) {
+  const std::vector<Check> checks = checkAll(subjectOf(options));
+  for (const Check& each : checks) {
+    std::cout << lineOf(each) << '\n';
+  }
+  std::cout.flush();
+  return areGood(checks) ? kExitSuccess : kExitConfiguration;
+}
+
 int run(int argumentCount, char** arguments) {
   shapeHeap();
   const ServiceCommand command =
@@ -90,6 +101,7 @@ int run(int argumentCount, char** arguments) {
   std::cout << command.output << std::flush;
   if (command.usage.failed()) return refuse(command.usage->text, command.usage->code);
   if (!command.options) return kExitSuccess;
+  if (command.options->isCheck) return check(*command.options);
   HostSetup setup;
   const Status prepared = setup.prepare(*command.options);
   if (prepared.failed()) return refuse(prepared->text, prepared->code);
@@ -97,7 +109,7 @@ int run(int argumentCount, char** arguments) {
   LinuxPlatform platform(setup.configuration, command.options->stateDirectory, setup.deviceProperties,
                          {setup.clock, *setup.log, serviceManager, [&setup] { setup.settleLog(); },
                           [&setup] { return setup.readConfiguration(); },
-                          [&setup](platform::LogLevel level) { setup.setLogLevel(level); }});
+                          [&setup](platform::LogLevel level) { setup.setLogLevel(level); }, &setup.sessionIds});
   int status = kExitFailure;
   try {
     status = serve(platform, setup);

@@ -38,7 +38,7 @@ void addField(std::string& out, std::string_view name, std::string_view value) {
 }
 
 // On whose behalf the thread works that logs.
-void addClient(std::string& out, platform::SessionNumber session) {
+void addClient(std::string& out, std::int64_t session) {
   const LogClient client = LogClientScope::current();
   if (client.connection != 0) {
     addField(out, "TARN_PID", std::to_string(client.process));
@@ -67,7 +67,7 @@ UniqueDescriptor makeSocket() {
 }  // namespace
 
 JournalOutput::JournalOutput(std::string socketPath, SessionSource sessionOf)
-    : path_(std::move(socketPath)), sessionOf_(sessionOf) {}
+    : path_(std::move(socketPath)), sessionOf_(std::move(sessionOf)) {}
 
 Status JournalOutput::open() {
   sockaddr_un address{};
@@ -99,7 +99,7 @@ std::string JournalOutput::formed(double, const platform::LogEntry& entry) const
   if (const std::string_view id = messageIdOf(platform::LogConditionScope::current()); !id.empty()) {
     addField(fields, "MESSAGE_ID", id);
   }
-  addClient(fields, sessionOf_ == nullptr ? 0 : sessionOf_());
+  addClient(fields, sessionOf_ ? sessionOf_() : 0);
   return fields;
 }
 

@@ -9,7 +9,7 @@
 //   SYSLOG_IDENTIFIER  the program
 //   MESSAGE_ID         of the condition that the entry tells of, when it is one of host/log/JournalCatalog.h
 //   TARN_PID, TARN_UID the client on whose behalf the thread works, when it does so for one
-//   TARN_SESSION       the session that it works for, counted from 1 in each run, likewise
+//   TARN_SESSION       the session that it works for, by its id in the recorder's file (LogSessionIds), likewise
 //
 // One datagram an entry, which the journal takes at once or not at all: its own library waits for a journal that
 // stalls. A field is NAME=value and a line end or, when the value has several lines, NAME, a line end, the value's
@@ -19,12 +19,13 @@
 // TARN_CATEGORY=CODE` selects by them. The entry's own time isn't sent: the journal stamps what it takes.
 #pragma once
 
+#include <cstdint>
+#include <functional>
 #include <string>
 #include <string_view>
 
 #include "host/log/LogOutput.h"
 #include "host/system/UniqueDescriptor.h"
-#include "platform/SessionRecords.h"
 #include "plist/Result.h"
 
 namespace tarn::linux_host {
@@ -34,8 +35,8 @@ class JournalOutput final : public LogOutput {
   // Where systemd's journal listens for entries of this form; another path serves tests.
   static constexpr const char* kSocket = "/run/systemd/journal/socket";
 
-  // For which session the calling thread works, 0 for none.
-  using SessionSource = platform::SessionNumber (*)() noexcept;
+  // The id of the session for which the calling thread works, 0 for none. Called on any thread; it throws nothing.
+  using SessionSource = std::function<std::int64_t()>;
 
   // Opens nothing; the path must fit a socket address (107 bytes), or open() fails.
   explicit JournalOutput(std::string socketPath = kSocket, SessionSource sessionOf = nullptr);

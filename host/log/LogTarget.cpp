@@ -24,7 +24,7 @@ Result<std::unique_ptr<QueuedLog>> openLog(std::string_view target, platform::Lo
   std::unique_ptr<LogOutput> output;
   std::string fallback;
   if (target == "journal") {
-    auto journal = std::make_unique<JournalOutput>(journalSocket, sessionOf);
+    auto journal = std::make_unique<JournalOutput>(journalSocket, std::move(sessionOf));
     if (const auto error = journal->open(); error.failed()) {
       fallback = "no journal on this machine, the log goes to the standard error stream" + errorSuffix(*error);
     } else {

@@ -22,7 +22,7 @@ constexpr const char* kFooter =
     "socket\n"
     "or the log can't be used, or another service is live on the socket); 2 when a client ended it; 64 for wrong "
     "usage;\n"
-    "78 for a wrong configuration or device-properties file.";
+    "78 for a wrong configuration or device-properties file, or when --check finds something bad.";
 
 std::string checkNotEmpty(const std::string& text) {
   return text.empty() ? "must not be empty" : "";
@@ -61,6 +61,9 @@ void addOptions(CLI::App& app, ServiceOptionTexts& raw) {
                  "Where the log goes: stderr, journal, or a file that is appended to (default: stderr)")
       ->type_name("stderr|journal|FILE")
       ->check(checkNotEmpty);
+  app.add_flag("--check", raw.check,
+               "Start nothing: say whether options, configuration, state directory, store, space and socket would do, "
+               "one line each");
 }
 
 ServiceCommand refuse(std::string text) {
@@ -111,6 +114,7 @@ ServiceCommand parseServiceCommand(int argumentCount, const char* const* argumen
   options.defaultDevicePropertiesFile = defaultDevicePropertiesFile(environment);
   options.logLevel = logLevelFromName(raw.logLevel);
   options.logTarget = raw.logTarget;
+  options.isCheck = raw.check;
   return {std::move(options), {}, {}};
 }
 

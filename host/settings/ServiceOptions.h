@@ -39,6 +39,7 @@ struct ServiceOptions {
   // What is logged, from this level on, and where: "stderr", "journal" or a file's path.
   std::optional<platform::LogLevel> logLevel;  // nothing: as the configuration says
   std::string logTarget = "stderr";
+  bool isCheck = false;  // say whether all of this would do, and exit
 };
 
 // What a command line asks for: exactly one of its members says so.
@@ -56,6 +57,7 @@ struct ServiceOptionTexts {
   std::string devicePropertiesFile;
   std::string logLevel;
   std::string logTarget = "stderr";
+  bool check = false;
 };
 
 // Puts the whole command line into `app`: what parses it here, and what manual pages and completions are made of.

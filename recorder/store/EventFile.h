@@ -75,6 +75,8 @@ class EventFile {
   // event or note of each opening and after what is carried into the file.
   [[nodiscard]] Status beginRun(const RunFacts& run);
   bool hasBegunRun() const noexcept { return runBegun_; }
+  // The greatest id of a session that was given before this run; once it has begun.
+  std::int64_t lastSessionBefore() const noexcept { return sessions_.lastBefore(); }
   // Notes that it ended well, in a transaction of its own.
   [[nodiscard]] Status endRun(double time);
   // What happened to a session, after the events appended so far; in a transaction.

@@ -68,7 +68,9 @@ class SessionTable {
   [[nodiscard]] int write(const SessionNote& note, double seconds);
   // A message repeated that of an event (0: it isn't known), and came after another one. In a transaction.
   [[nodiscard]] int repeat(const SessionNote& note, std::int64_t event, std::int64_t after);
-  // The session's row, 0 for nobody's. After beginRun().
+  // The greatest id that the runs before gave. After beginRun(), as the next.
+  std::int64_t lastBefore() const noexcept { return sessions_; }
+  // The session's row, 0 for nobody's.
   std::int64_t rowOf(platform::SessionNumber session) const noexcept { return session == 0 ? 0 : sessions_ + session; }
   // An event was handed over for it: the first and the last one of a period are kept. In a transaction.
   [[nodiscard]] int noteEvent(platform::SessionNumber session, std::int64_t event) {

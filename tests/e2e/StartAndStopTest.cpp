@@ -8,6 +8,7 @@
 
 #include <algorithm>
 #include <cstring>
+#include <sstream>
 
 #include "tests/e2e/support/RawSocket.h"
 #include "tests/e2e/support/ServiceFixture.h"
@@ -278,6 +279,59 @@ TEST_F(StartAndStop, TheLogGoesToAFileWhenAsked) {
   EXPECT_EQ(line.substr(10, 1), "T") << line;
   EXPECT_NE(line.find("Z info tarnrr "), std::string::npos) << line;
   EXPECT_NE(line.find("     TarnReportingSession:"), std::string::npos) << line;
+}
+
+// Before there is anything, beside a live service, and where something won't do.
+TEST_F(StartAndStop, CheckSaysWhatWouldDoAndTouchesNothing) {
+  const std::vector<std::string> names{"options",          "configuration", "device-properties",
+                                       "state-directory",  "store",         "space",
+                                       "socket-directory", "socket",        "unit"};
+  const auto begins = [&](const std::string& output) {
+    std::istringstream lines(output);
+    std::vector<std::string> found;
+    for (std::string line; std::getline(lines, line);) {
+      found.push_back(line.substr(0, line.find(':')));
+    }
+    return found;
+  };
+  std::vector<std::string> allGood;
+  for (const std::string& name : names) {
+    allGood.push_back("good " + name);
+  }
+  const Finished fresh = runService({"--check", "--socket", socket()});
+  EXPECT_EQ(fresh.status, 0) << fresh.output << fresh.complaints;
+  EXPECT_EQ(begins(fresh.output), allGood);
+  EXPECT_NE(::access(state().c_str(), F_OK), 0);
+  EXPECT_EQ(ctl({"check"}).status, 0);
+  EXPECT_NE(::access(state().c_str(), F_OK), 0);
+
+  ASSERT_TRUE(startService());
+  const auto client = sendMessages(3);
+  const Finished beside = runService({"--check", "--socket", socket()});
+  EXPECT_EQ(beside.status, 0) << beside.output;
+  EXPECT_NE(beside.output.find("good socket: " + socket() + " answers, process " + std::to_string(service().id())),
+            std::string::npos)
+      << beside.output;
+  const Finished asJson = ctl({"check", "--json"});
+  EXPECT_EQ(asJson.status, 0);
+  std::vector<std::string> told;
+  for (const json& line : jsonLines(asJson.output)) {
+    told.push_back(line.at("check"));
+    EXPECT_EQ(line.at("good"), true) << line;
+  }
+  EXPECT_EQ(told, names);
+  EXPECT_EQ(stopService(SIGTERM), 0);
+  EXPECT_EQ(recordedMessages(), 3U);
+
+  writeFile(state() + "/recorder.sqlite3", "no database");
+  writeFile(directory_ / "bad.toml", "[nothing]\n");
+  const Finished bad = runService({"--check", "--socket", socket(), "--config", directory_ / "bad.toml"});
+  EXPECT_EQ(bad.status, 78);
+  EXPECT_NE(bad.output.find("bad configuration: " + (directory_ / "bad.toml") + ":1: unknown section [nothing]"),
+            std::string::npos)
+      << bad.output;
+  EXPECT_EQ(ctl({"check"}).status, 1);
+  EXPECT_EQ(contentOf(state() + "/recorder.sqlite3"), "no database");
 }
 
 }  // namespace

@@ -10,6 +10,9 @@
 #include <future>
 #include <thread>
 
+#include "host/log/JournalOutput.h"
+#include "host/log/PrefixedLog.h"
+#include "host/loop/WorkOwner.h"
 #include "host/machine/LinuxClock.h"
 #include "platform/SessionRecords.h"
 #include "platform/TarnReportingServiceProtocol.h"
@@ -60,7 +63,8 @@ class LinuxPlatformTest : public ::testing::Test {
                                             [this] {
                                               return Result<HostConfiguration>{next_, {}};
                                             },
-                                            [this](platform::LogLevel level) { level_ = level; }});
+                                            [this](platform::LogLevel level) { level_ = level; },
+                                            &ids_});
     service_ = std::make_shared<testing::RecordingService>(platform_->loop().queue());
     return *platform_;
   }
@@ -81,6 +85,20 @@ class LinuxPlatformTest : public ::testing::Test {
     ASSERT_EQ(platform_->start().text(), "");
     ASSERT_EQ(listen(), "");
     serve();
+  }
+  // What an entry that is logged for a new session of this process says of it; empty: nothing.
+  std::string journalSession(const std::string& process) {
+    platform::SessionRecords* const records = platform_->facilities().sessionRecords;
+    platform::SessionFacts facts;
+    facts.process = process;
+    const platform::SessionScope scope(records, records->created(facts));
+    const JournalOutput journal(folder_.path("journal"), [this] { return ids_.of(WorkOwner::current()); });
+    const std::string entry = journal.formed(0, {kHostCategory, platform::LogLevel::Default, "", 0, "text"});
+    const std::string field = "\nTARN_SESSION=";
+    const std::size_t place = entry.find(field);
+    return place == std::string::npos
+               ? ""
+               : entry.substr(place + field.size(), entry.find('\n', place + 1) - place - field.size());
   }
   // Serves nothing but the end.
   void end() {
@@ -121,6 +139,7 @@ class LinuxPlatformTest : public ::testing::Test {
   NotedManager manager_;
   HostConfiguration configuration_;
   HostConfiguration next_;  // as the files have it when they are read anew
+  LogSessionIds ids_;
   platform::LogLevel level_ = platform::LogLevel::Default;
   std::promise<void> letGo_;
   std::optional<LinuxPlatform> platform_;
@@ -415,7 +434,7 @@ TEST_F(LinuxPlatformTest, WithoutTheRecorderNothingStandsInAndNothingIsWritten) 
   ASSERT_EQ(listen(), "");
   const platform::Facilities& facilities = platform_->facilities();
   EXPECT_FALSE(facilities.wattlog || facilities.pylon || facilities.snare || facilities.tattle || facilities.gyre);
-  EXPECT_FALSE(facilities.rtcReporting || facilities.sessionRecords);
+  EXPECT_FALSE(facilities.rtcReporting);
   EXPECT_TRUE(facilities.flume && facilities.performanceTrace && facilities.signposts);
   EXPECT_FALSE(facilities.tally.eventIsInUse("sys.oxbow.tarnkit.Playback.Start"));
   facilities.tally.sendEventLazy("event", [] { return plist::Dictionary(); });
@@ -448,6 +467,43 @@ TEST_F(LinuxPlatformTest, AnEventIsThatOfTheSessionForWhichItWasHandedOver) {
                           "LEFT JOIN sessions ON sessions.id = events.session ORDER BY events.name"),
             (std::vector<std::string>{"a: a", "a delayed: a", "a queued: a", "b: b", "b delayed: b", "b queued: b",
                                       "nobody's: -"}));
+}
+
+TEST_F(LinuxPlatformTest, TheJournalNamesASessionByItsIdInTheFileAlsoInTheNextRun) {
+  std::vector<std::string> told;
+  for (const std::vector<std::string>& names : {std::vector<std::string>{"a", "b"}, {"c"}}) {
+    make();
+    ASSERT_EQ(platform_->start().text(), "");
+    ASSERT_EQ(listen(), "");
+    for (const std::string& name : names) {
+      told.push_back(name + ": " + journalSession(name));
+    }
+    end();
+    platform_.reset();
+  }
+  EXPECT_EQ(told, (std::vector<std::string>{"a: 1", "b: 2", "c: 3"}));
+  EXPECT_EQ(
+      recorder::ask(folder_.path("recorder.sqlite3"), "SELECT process || ': ' || id FROM sessions ORDER BY process"),
+      told);
+}
+
+TEST_F(LinuxPlatformTest, WithoutTheRecorderTheJournalCountsSessionsFromOneInEachRun) {
+  configuration_.recorderEnabled = false;
+  for (int run = 0; run < 2; ++run) {
+    make();
+    ASSERT_EQ(platform_->start().text(), "");
+    ASSERT_EQ(listen(), "");
+    EXPECT_EQ(journalSession("a"), "1");
+    EXPECT_EQ(journalSession("b"), "2");
+    end();
+    platform_.reset();
+  }
+}
+
+TEST_F(LinuxPlatformTest, TheJournalNamesNoSessionWhileIdsAreNotKnown) {
+  folder_.write("recorder.sqlite3/in the way", "");
+  make();
+  EXPECT_EQ(journalSession("a"), "");
 }
 
 TEST_F(LinuxPlatformTest, TemporaryFolderThatCannotBeMadeFailsTheStart) {

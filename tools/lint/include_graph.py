@@ -18,7 +18,7 @@ WORKERS = ("derived",) + DIAGNOSTICS + TELEMETRY
 # The host's rooms stand on these two.
 GROUND = BASE + ("host/system", "host/log")
 HOST = ("host/system", "host/log", "host/loop", "host/socket", "host/settings", "host/machine", "host/drivers",
-        "host/ring", "host/traces", "host/traces/analysis")
+        "host/ring", "host/traces", "host/traces/analysis", "host/check")
 # The recorder's database, and what lies beside it.
 STORE = ("recorder/store", "recorder/store/files", "recorder/store/rows", "recorder/store/reading",
          "recorder/store/retention")
@@ -59,6 +59,7 @@ ROOMS = {
     "host/ring": GROUND + ("host/loop", "wire", "clients/ring"),
     "host/socket": GROUND + ("host/loop", "host/ring", "wire"),
     "host/settings": GROUND + ("host/loop", "host/socket", "recorder"),
+    "host/check": GROUND + ("host/settings", "recorder/store"),
     "host/machine": GROUND + ("wire",),
     "host/drivers": GROUND,
     # Loaded by the service and linked to nothing of it: the facility's interface is all that it knows.

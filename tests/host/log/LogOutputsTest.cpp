@@ -161,7 +161,7 @@ TEST_F(JournalOutputTest, EntryOfAConditionHasItsIdentifier) {
 }
 
 TEST_F(JournalOutputTest, EntryOnBehalfOfAClientNamesItAndTheSession) {
-  const JournalOutput output(path_, []() noexcept -> platform::SessionNumber { return 12; });
+  const JournalOutput output(path_, [] { return 12; });
   const LogClientScope scope({.connection = 3, .process = 812, .user = 1000});
   EXPECT_TRUE(output.formed(5, entry("text")).ends_with("\nTARN_PID=812\nTARN_UID=1000\nTARN_SESSION=12\n"));
   EXPECT_TRUE(output_.formed(5, entry("text")).ends_with("\nTARN_PID=812\nTARN_UID=1000\n"));
