@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // Feeds a byte stream, in pieces whose sizes it picks itself, through the frame buffer and the request decoder; what
-// was accepted must encode and decode to the same again.
+// was accepted must encode and decode to the same again, and a decoder that has seen nothing must make the same of it.
 #include <algorithm>
 #include <cstddef>
 #include <cstdint>
@@ -25,7 +25,25 @@ void check(bool holds) {
   }
 }
 
+// What a decoder makes of a frame, the error included.
+std::string outcome(RequestDecoder& decoder, std::span<const std::byte> frame) {
+  DecodedRequest request;
+  Refusal refusal;
+  const DecodeVerdict verdict = decoder.decode(frame, request, refusal);
+  std::string text = std::to_string(static_cast<int>(verdict)) + ' ' + std::to_string(request.id) + ' ';
+  if (verdict == DecodeVerdict::Ok) {
+    Encoder(text).request(request.id, request);
+  } else {
+    text += std::to_string(static_cast<int>(refusal.code)) + refusal.text;
+  }
+  return text;
+}
+
 void checkFrame(RequestDecoder& decoder, std::span<const std::byte> frame) {
+  RequestDecoder fresh;
+  const std::string expected = outcome(fresh, frame);
+  // Also when its own keys are those that came last.
+  check(outcome(decoder, frame) == expected && outcome(decoder, frame) == expected);
   DecodedRequest request;
   Refusal refusal;
   const DecodeVerdict verdict = decoder.decode(frame, request, refusal);

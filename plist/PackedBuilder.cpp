@@ -82,6 +82,14 @@ void PackedBuilder::add(const ValueView& value) {
   level.holdsContainers = level.holdsContainers || value.kind() == Kind::Array || value.kind() == Kind::Dictionary;
 }
 
+void PackedBuilder::nameValues(const KeyList& keys, std::size_t count) {
+  std::uint64_t& hash = levels_.back().hash;
+  for (std::size_t i = 0; i < count; ++i) {
+    keys_.push_back(keys[i].text());
+    hash = KeyList::combineHash(hash, keys[i].hash());
+  }
+}
+
 // Takes the innermost level's bytes, and the references they hold, into a block.
 detail::Body* PackedBuilder::takeBody() {
   const Level& level = levels_.back();

@@ -54,6 +54,9 @@ class PackedBuilder {
   void add(std::string_view key, const ValueView& value);
   // Adds an item to the open array.
   void add(const ValueView& value);
+  // Makes entries of the values that were added so far, which are `count`, without keys: those of the list that stand
+  // first, in their order. Entries may follow. The list must stay until finishDictionary.
+  void nameValues(const KeyList& keys, std::size_t count);
   // Closes the open container. A dictionary with a key given twice yields nothing, and its values are dropped. An empty
   // one yields the empty dictionary, which has no block.
   std::optional<Dictionary> finishDictionary(KeyListCache& cache);

@@ -7,6 +7,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <cstring>
 #include <span>
 #include <string_view>
 
@@ -71,6 +72,16 @@ class CborReader {
   bool atBreak() const noexcept { return at_ != end_ && *at_ == kBreak; }
   // Over bytes that were looked at; there must be as many.
   void skip(std::size_t bytes) noexcept { at_ += bytes; }
+  // Whether these bytes come next.
+  bool startsWith(std::string_view bytes) const noexcept {
+    return bytes.size() <= left() && std::memcmp(at_, bytes.data(), bytes.size()) == 0;
+  }
+  // Moves over these bytes; false, and nothing moved, when others come next.
+  bool takeBytes(std::string_view bytes) noexcept {
+    if (!startsWith(bytes)) return false;
+    at_ += bytes.size();
+    return true;
+  }
 
   // False when the bytes end inside the head, or it is reserved: information 28 to 30, or an integer or a tag that
   // leaves its argument open. Arguments need not be in their shortest form. After a false the place is somewhere inside

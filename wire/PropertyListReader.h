@@ -23,8 +23,7 @@
 
 namespace tarn::wire {
 
-// The value of a 16-bit float, exactly: every one has a 32-bit float of the same value. Infinities and not-a-numbers
-// stay what they are.
+// The value of a 16-bit float, exactly. Infinities and not-a-numbers stay what they are.
 float floatFromHalf(std::uint16_t half) noexcept;
 
 // Reads from a reader that it shares with its owner, at whose place it goes on, and stops at the first trouble. Texts,
@@ -55,8 +54,12 @@ class PropertyListReader {
 
   // The entries or items of a container whose head was read, up to its end; the sink gets each of them. `depth` is its
   // level, 1 for an outermost one. False at the first trouble; what the sink got until then is the caller's to drop.
-  bool readEntries(const CborHead& head, std::size_t depth);
+  // Of the entries, `known` were read before.
+  bool readEntries(const CborHead& head, std::size_t depth, std::uint64_t known = 0);
   bool readItems(const CborHead& head, std::size_t depth);
+  // The next value, at this level of the container that it is in: an entry under this key, or an item when that is
+  // null.
+  bool readValue(const std::string_view* key, std::size_t depth);
   // The value whose head was read; not for containers. Texts and data look into the frame.
   bool readScalar(const CborHead& head, plist::ValueView& value);
 
@@ -93,22 +96,13 @@ bool PropertyListReader<Sink>::mayHold(const CborHead& head, std::size_t depth) 
   return depth <= kMaxNesting || fail("nested too deep");
 }
 
-// Entry after entry: a key, then a value. A container among them goes through readContainer(), which gives it to the
-// sink under its key when it has ended. A count of 2^64 - 1 ends with the frame, at the first key that isn't there.
+// Entry after entry: a key, then a value. A count of 2^64 - 1 ends with the frame, at the first key that isn't there.
 template <class Sink>
-bool PropertyListReader<Sink>::readEntries(const CborHead& head, std::size_t depth) {
+bool PropertyListReader<Sink>::readEntries(const CborHead& head, std::size_t depth, std::uint64_t known) {
   if (!mayHold(head, depth)) return false;
-  for (std::uint64_t i = 0; i < head.argument; ++i) {
+  for (std::uint64_t i = known; i < head.argument; ++i) {
     std::string_view key;
-    CborHead valueHead;
-    if (!readKey(key) || !in_.readHead(valueHead)) return false;
-    if (isContainer(valueHead)) [[unlikely]] {
-      if (!readContainer(valueHead, &key, depth + 1)) return false;
-      continue;
-    }
-    plist::ValueView value;
-    if (!readScalar(valueHead, value)) return false;
-    sink_.add(key, value);
+    if (!readKey(key) || !readValue(&key, depth)) return false;
   }
   return true;
 }
@@ -118,20 +112,26 @@ template <class Sink>
 bool PropertyListReader<Sink>::readItems(const CborHead& head, std::size_t depth) {
   if (!mayHold(head, depth)) return false;
   for (std::uint64_t i = 0; i < head.argument; ++i) {
-    CborHead itemHead;
-    if (!in_.readHead(itemHead)) return false;
-    if (isContainer(itemHead)) {
-      if (!readContainer(itemHead, nullptr, depth + 1)) return false;
-      continue;
-    }
-    plist::ValueView value;
-    if (!readScalar(itemHead, value)) return false;
-    sink_.add(value);
+    if (!readValue(nullptr, depth)) return false;
   }
   return true;
 }
 
-// Opens the container in the sink, fills it and ends it there. This is where the reader calls itself: once a level, and
+// A container goes through readContainer(), which gives it to the sink when it has ended.
+template <class Sink>
+inline bool PropertyListReader<Sink>::readValue(const std::string_view* key, std::size_t depth) {
+  CborHead head;
+  if (!in_.readHead(head)) return false;
+  if (isContainer(head)) [[unlikely]] {
+    return readContainer(head, key, depth + 1);
+  }
+  plist::ValueView value;
+  if (!readScalar(head, value)) return false;
+  key != nullptr ? sink_.add(*key, value) : sink_.add(value);
+  return true;
+}
+
+// Opens the container in the sink, fills it and ends it there. The reader calls itself here: once a level, and
 // mayHold() ends that at kMaxNesting. A key that stands twice shows at the end, when the sink looks for the list of
 // keys.
 template <class Sink>
@@ -155,8 +155,8 @@ bool PropertyListReader<Sink>::readKey(std::string_view& key) {
   return in_.readBytes(head.argument, key) && (isUtf8(key) || fail("a key that is not UTF-8"));
 }
 
-// By major type. Containers have operations of their own, so here one is trouble: an error's text that is an array, for
-// example.
+// By major type. Containers have operations of their own, so one is trouble here: an error's text that is an array,
+// say.
 template <class Sink>
 bool PropertyListReader<Sink>::readScalar(const CborHead& head, plist::ValueView& value) {
   switch (head.major) {

@@ -19,8 +19,8 @@ namespace {
 class RequestPass {
  public:
   RequestPass(std::span<const std::byte> frame, DecodedRequest& request, plist::PackedBuilder& builder,
-              plist::KeyListCache& keyLists) noexcept
-      : in_(frame), request_(request), builder_(builder), keyLists_(keyLists) {}
+              plist::KeyListCache& keyLists, KeyShapes& shapes) noexcept
+      : in_(frame), request_(request), builder_(builder), keyLists_(keyLists), shapes_(shapes) {}
 
   bool run();
   bool hasID() const noexcept { return hasID_; }
@@ -43,6 +43,12 @@ class RequestPass {
   bool read(Number& number, const char* expected);
   bool read(plist::Dictionary& dictionary, const char* expected);
   bool read(ReporterIDs& reporterIDs, const char* expected);
+  // The entries at the front of a dictionary whose keys are those of a shape: their values, without the keys.
+  struct Known {
+    const KeyShape* shape = nullptr;
+    std::size_t count = 0;
+  };
+  bool readKnown(PropertyListReader<BuilderSink>& reader, std::uint64_t entries, Known& known);
   bool countOpenItems();
 
   bool fail(ErrorCode code, const char* trouble) noexcept {
@@ -50,12 +56,18 @@ class RequestPass {
     trouble_ = trouble;
     return false;
   }
+  // Drops what was made of the dictionary.
+  bool notPropertyList(const char* trouble) noexcept {
+    builder_.reset();
+    return fail(ErrorCode::NotPropertyList, trouble);
+  }
   bool badArgument(const char* trouble) noexcept { return fail(ErrorCode::BadArguments, trouble); }
 
   CborReader in_;
   DecodedRequest& request_;
   plist::PackedBuilder& builder_;
   plist::KeyListCache& keyLists_;
+  KeyShapes& shapes_;
   std::uint64_t items_ = 0;  // of the frame's array
   bool openEnded_ = false;
   bool hasID_ = false;
@@ -161,13 +173,33 @@ bool RequestPass::read(plist::Dictionary& dictionary, const char* expected) {
   BuilderSink sink(builder_, keyLists_);
   PropertyListReader<BuilderSink> reader(in_, sink);
   builder_.begin();
-  if (!reader.readEntries(head, 1)) {
-    builder_.reset();
-    return fail(ErrorCode::NotPropertyList, reader.trouble());
+  Known known;
+  if (!readKnown(reader, head.argument, known)) return notPropertyList(reader.trouble());
+  if (known.shape != nullptr) {
+    if (known.count == head.argument) {
+      dictionary = builder_.finishDictionary(known.shape->keys());
+      return true;
+    }
+    builder_.nameValues(known.shape->keys(), known.count);
   }
+  if (!reader.readEntries(head, 1, known.count)) return notPropertyList(reader.trouble());
   std::optional<plist::Dictionary> finished = builder_.finishDictionary(keyLists_);
-  if (!finished) return fail(ErrorCode::NotPropertyList, "a key given twice");
+  if (!finished) return notPropertyList("a key given twice");
+  shapes_.remember(finished->keys());
   dictionary = std::move(*finished);
+  return true;
+}
+
+// Up to the first key that no shape expects there. Keys of a shape are all different, so none of them needs a look.
+bool RequestPass::readKnown(PropertyListReader<BuilderSink>& reader, std::uint64_t entries, Known& known) {
+  while (known.count < entries) {
+    const KeyShape* const shape = shapes_.next(in_, entries, known.shape, known.count);
+    if (shape == nullptr) return true;
+    known.shape = shape;
+    for (; known.count < entries && in_.takeBytes(shape->key(known.count)); ++known.count) {
+      if (!reader.readValue(nullptr, 1)) return false;
+    }
+  }
   return true;
 }
 
@@ -218,7 +250,7 @@ DecodeVerdict judge(std::span<const std::byte> frame, const RequestPass& pass, R
 
 DecodeVerdict RequestDecoder::decode(std::span<const std::byte> frame, DecodedRequest& request, Refusal& refusal) {
   request = DecodedRequest{};
-  RequestPass pass(frame, request, builder_, keyLists_);
+  RequestPass pass(frame, request, builder_, keyLists_, shapes_);
   try {
     if (pass.run()) [[likely]] {
       return DecodeVerdict::Ok;

@@ -18,7 +18,8 @@
 // Nesting deeper than a property list may have costs no stack, and little more memory than the frame itself.
 //
 // One decoder can serve all connections of a thread: it keeps nothing between frames but scratch space and the key
-// lists seen lately. Threads: one at a time. Throws nothing: a frame that memory is missing for is refused.
+// lists seen lately, and what it makes of a frame is the same whatever came before. Threads: one at a time. Throws
+// nothing: a frame that memory is missing for is refused.
 #pragma once
 
 #include <cstddef>
@@ -28,6 +29,7 @@
 #include <string_view>
 
 #include "plist/PackedBuilder.h"
+#include "wire/KeyShapes.h"
 #include "wire/Request.h"
 
 namespace tarn::wire {
@@ -63,6 +65,7 @@ class RequestDecoder {
   // Scratch space and lists for decode(); nothing of an earlier frame.
   plist::PackedBuilder builder_;
   plist::KeyListCache keyLists_;
+  KeyShapes shapes_;
 };
 
 }  // namespace tarn::wire

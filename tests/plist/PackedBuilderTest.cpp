@@ -30,6 +30,38 @@ TEST(PackedBuilder, BuildsNestedContainers) {
   EXPECT_EQ(*outer, (Dictionary{{"a", 1}, {"b", Dictionary{{"x", "inner"}}}, {"c", Array{2.5, *inner}}}));
 }
 
+TEST(PackedBuilder, NamesValuesAfterwards) {
+  KeyListCache cache;
+  PackedBuilder builder;
+  const Dictionary named{{"a", 1}, {"b", Array{2}}, {"c", 3}};
+  for (const bool oneMore : {false, true}) {
+    builder.begin();
+    builder.add(1);
+    builder.add(Array{2});
+    builder.nameValues(named.keys(), 2);
+    if (oneMore) {
+      builder.add("x", 4);
+    }
+    const auto made = builder.finishDictionary(cache);
+    ASSERT_TRUE(made);
+    EXPECT_EQ(*made,
+              oneMore ? (Dictionary{{"a", 1}, {"b", Array{2}}, {"x", 4}}) : (Dictionary{{"a", 1}, {"b", Array{2}}}));
+    EXPECT_EQ(made->keys().hash(), oneMore ? (Dictionary{{"a", 1}, {"b", 2}, {"x", 4}}).keys().hash()
+                                           : (Dictionary{{"a", 1}, {"b", 2}}).keys().hash());
+  }
+}
+
+TEST(PackedBuilder, ANamedKeyGivenOnceMoreIsRefused) {
+  KeyListCache cache;
+  PackedBuilder builder;
+  const Dictionary named{{"a", 1}, {"b", 2}};
+  builder.begin();
+  builder.add(1);
+  builder.nameValues(named.keys(), 1);
+  builder.add("a", 2);
+  EXPECT_FALSE(builder.finishDictionary(cache));
+}
+
 TEST(PackedBuilder, EmptyContainersHoldNothing) {
   KeyListCache cache;
   PackedBuilder builder;
