@@ -115,7 +115,9 @@ void beginFilter(Churner& churner, Slot& slot) {
 }
 
 void endFilter(Slot& slot) {
-  if (slot.link != nullptr) pw_core_destroy(slot.churner->core, slot.link);
+  if (slot.link != nullptr) {
+    pw_core_destroy(slot.churner->core, slot.link);
+  }
   slot.link = nullptr;
   pw_filter_destroy(slot.filter);
 }
@@ -124,8 +126,9 @@ void endFilter(Slot& slot) {
 void beatOnce(Churner& churner) {
   Slot& slot = churner.slots[churner.next++ % kAtOnce];
   if (churner.way == Way::Link) {
-    for (Slot& begun : churner.slots)
+    for (Slot& begun : churner.slots) {
       linkOnce(begun);
+    }
     endFilter(slot);
     ++churner.over;
     beginFilter(churner, slot);
@@ -180,7 +183,9 @@ std::string_view word(const spa_dict* words, const char* key) {
 // The first sink there is, and the first port into it, which is told after it.
 void seen(void* data, std::uint32_t id, std::uint32_t, const char*, std::uint32_t, const spa_dict* words) {
   auto& churner = *static_cast<Churner*>(data);
-  if (churner.sink.empty() && word(words, PW_KEY_MEDIA_CLASS) == "Audio/Sink") churner.sink = std::to_string(id);
+  if (churner.sink.empty() && word(words, PW_KEY_MEDIA_CLASS) == "Audio/Sink") {
+    churner.sink = std::to_string(id);
+  }
   if (churner.sink.empty() || word(words, PW_KEY_NODE_ID) != churner.sink) return;
   if (word(words, PW_KEY_PORT_DIRECTION) != "in" || !churner.sinkPort.empty()) return;
   churner.sinkPort = std::to_string(id);
@@ -213,8 +218,12 @@ int main(int count, char** words) {
   pw_context* const context = pw_context_new(loop, nullptr, 0);
   churner.core = pw_context_connect(context, nullptr, 0);
   if (churner.core == nullptr) return 1;
-  if (count == 4) churner.way = wayOf(words[2]);
-  if (churner.way == Way::Link) findSink(churner);
+  if (count == 4) {
+    churner.way = wayOf(words[2]);
+  }
+  if (churner.way == Way::Link) {
+    findSink(churner);
+  }
   churner.turn = pw_loop_add_event(loop, &turn, &churner);
   for (Slot& slot : churner.slots) {
     slot.churner = &churner;
@@ -228,7 +237,9 @@ int main(int count, char** words) {
   pw_loop_update_timer(loop, timer, &due, nullptr, false);
   pw_main_loop_run(churner.loop);
   std::printf("%lu", churner.over);
-  if (churner.way == Way::Link) std::printf(" %lu", churner.heard);
+  if (churner.way == Way::Link) {
+    std::printf(" %lu", churner.heard);
+  }
   std::printf("\n");
   pw_context_destroy(context);
   pw_main_loop_destroy(churner.loop);
