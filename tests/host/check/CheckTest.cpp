@@ -83,6 +83,9 @@ TEST_F(CheckTest, OptionsNameALogThatCanBeWritten) {
   EXPECT_FALSE(std::filesystem::exists(folder_.path("log")));
   subject_.options.logTarget = folder_.path("none/log");
   expectBad(checkOptions(subject_.options), "No such file or directory; name another file with --log-target");
+  // The folder of a name without one is the one that the service is started in.
+  subject_.options.logTarget = "log-that-is-not-there";
+  expectGood(checkOptions(subject_.options), "the log goes to log-that-is-not-there");
 }
 
 TEST_F(CheckTest, ConfigurationIsReadWithItsDropIns) {
@@ -107,6 +110,15 @@ TEST_F(CheckTest, DeviceProperties) {
   expectBad(checkDeviceProperties(subject_.options), "mend the file");
 }
 
+TEST_F(CheckTest, DevicePropertiesThatAreNamedHaveToBeThere) {
+  subject_.options.defaultDevicePropertiesFile = folder_.path("d.json");
+  folder_.write("d.json", "{}");
+  subject_.options.devicePropertiesFile = folder_.path("named.json");
+  expectBad(checkDeviceProperties(subject_.options), "No such file or directory");
+  folder_.write("named.json", "{}");
+  expectGood(checkDeviceProperties(subject_.options), folder_.path("named.json"));
+}
+
 TEST_F(CheckTest, StateDirectory) {
   expectGood(checkStateDirectory(state()), "mode 0750");
   expectGood(checkStateDirectory(folder_.path("a/b")), "the service makes it");
@@ -115,8 +127,15 @@ TEST_F(CheckTest, StateDirectory) {
   expectBad(checkStateDirectory(folder_.path("file")), "is no folder");
   std::filesystem::create_symlink("nowhere", folder_.path("link"));
   expectBad(checkStateDirectory(folder_.path("link")), "is a link to nothing");
-  ::chmod(state().c_str(), 0777);
-  expectBad(checkStateDirectory(state()), "has mode 0777");
+}
+
+TEST_F(CheckTest, StateDirectoryThatOthersMayChange) {
+  for (const auto& [mode, text] : {std::pair<mode_t, const char*>{0777, "0777"}, {0770, "0770"}, {0702, "0702"}}) {
+    ::chmod(state().c_str(), mode);
+    expectBad(checkStateDirectory(state()), std::string("has mode ") + text);
+  }
+  ::chmod(state().c_str(), 0755);
+  expectGood(checkStateDirectory(state()), "mode 0755");
 }
 
 TEST_F(CheckTest, StateDirectoryWithALinkInTheLocksPlace) {
