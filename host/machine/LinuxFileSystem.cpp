@@ -25,23 +25,21 @@ constexpr mode_t kFilePermissions = 0666;  // less the process's mask
 // Holds nothing back: a disk that is full says so to the write that it refuses.
 class OpenFile final : public platform::WritableFile {
  public:
-  explicit OpenFile(int descriptor) : descriptor_(descriptor) {}
-  ~OpenFile() override { static_cast<void>(close()); }
-  OpenFile(const OpenFile&) = delete;
-  OpenFile& operator=(const OpenFile&) = delete;
+  explicit OpenFile(UniqueDescriptor descriptor) : descriptor_(std::move(descriptor)) {}
 
   Status write(std::string_view bytes) override {
-    return descriptor_ < 0 ? systemError(EBADF) : writeAll(descriptor_, bytes);
+    return descriptor_ ? writeAll(descriptor_.get(), bytes) : systemError(EBADF);
   }
 
   Status close() override {
-    if (descriptor_ < 0) return systemError(EBADF);
+    if (!descriptor_) return systemError(EBADF);
     // A disk that is written to later reports its failure here.
-    return ::close(std::exchange(descriptor_, -1)) == 0 ? Status() : lastSystemError();
+    return ::close(descriptor_.release()) == 0 ? Status() : lastSystemError();
   }
 
  private:
-  int descriptor_;  // -1 once closed
+  // Empty once closed. What is left open goes by itself, without an error's text, for which there may be no memory.
+  UniqueDescriptor descriptor_;
 };
 
 Status copyContent(int from, FileReplacement& to) {
@@ -95,9 +93,9 @@ Status LinuxFileSystem::createFile(std::string_view path) {
 }
 
 Result<std::unique_ptr<platform::WritableFile>> LinuxFileSystem::openForWriting(std::string_view path) {
-  const int file = ::open(std::string(path).c_str(), O_WRONLY | O_TRUNC | O_CLOEXEC | O_NOFOLLOW);
-  if (file < 0) return {nullptr, lastSystemError()};
-  return {std::make_unique<OpenFile>(file), {}};
+  UniqueDescriptor file(::open(std::string(path).c_str(), O_WRONLY | O_TRUNC | O_CLOEXEC | O_NOFOLLOW));
+  if (!file) return {nullptr, lastSystemError()};
+  return {std::make_unique<OpenFile>(std::move(file)), {}};
 }
 
 Result<std::string> LinuxFileSystem::readFile(std::string_view path, std::size_t mostBytes) {

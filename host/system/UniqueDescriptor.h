@@ -35,6 +35,8 @@ class UniqueDescriptor {
   // -1 when there is none. Valid only as long as this object owns it: after reset() the number may be another file's.
   int get() const noexcept { return descriptor_; }
   explicit operator bool() const noexcept { return descriptor_ >= 0; }
+  // Whoever calls closes it from now on.
+  [[nodiscard]] int release() noexcept { return std::exchange(descriptor_, -1); }
   // Closes it now; nothing when there is none.
   void reset() noexcept {
     if (descriptor_ >= 0) {

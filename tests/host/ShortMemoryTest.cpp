@@ -5,7 +5,10 @@
 #include <sys/socket.h>
 
 #include <atomic>
+#include <cstddef>
 #include <cstdint>
+#include <filesystem>
+#include <iterator>
 #include <memory>
 #include <new>
 #include <string>
@@ -13,6 +16,7 @@
 #include "host/loop/LinuxWorkQueues.h"
 #include "host/loop/MainLoop.h"
 #include "host/loop/ServerQueue.h"
+#include "host/machine/LinuxFileSystem.h"
 #include "host/machine/OverflowFile.h"
 #include "host/system/MemoryReserve.h"
 #include "testing/ManualClock.h"
@@ -111,6 +115,38 @@ TEST(OverflowFileShortMemory, WhatCouldNotBeKeptTakesNoRoom) {
   EXPECT_GT(failed, 0);
   EXPECT_EQ(file.size()->load(), static_cast<std::int64_t>(kBytes));
   EXPECT_EQ(file.read(kept.value).value, block);
+}
+
+std::ptrdiff_t openDescriptors() {
+  const std::filesystem::directory_iterator all("/proc/self/fd");
+  return std::distance(begin(all), end(all));
+}
+
+TEST(LinuxFileSystemShortMemory, AFileThatIsOpenOrClosedEndsWithoutMemory) {
+  TemporaryFolder folder;
+  folder.write("file", "");
+  LinuxFileSystem files{{folder.path("logs"), folder.path()}};
+  const std::ptrdiff_t before = openDescriptors();
+  for (const bool isClosed : {false, true}) {
+    auto file = files.openForWriting(folder.path("file"));
+    ASSERT_FALSE(file.failed());
+    ASSERT_EQ(isClosed ? file.value->close() : Status(), Status());
+    const FailingAllocations failing(1, FailingAllocations::kAll);
+    file.value.reset();
+    EXPECT_FALSE(failing.happened());
+  }
+  EXPECT_EQ(openDescriptors(), before);
+}
+
+TEST(LinuxFileSystemShortMemory, AFileThatCantBeHeldIsClosed) {
+  TemporaryFolder folder;
+  folder.write("file", "");
+  LinuxFileSystem files{{folder.path("logs"), folder.path()}};
+  const std::string path = folder.path("file");
+  const std::ptrdiff_t before = openDescriptors();
+  const int failed = failEachAllocation([&] { static_cast<void>(files.openForWriting(path)); }, [] {});
+  EXPECT_GT(failed, 0);
+  EXPECT_EQ(openDescriptors(), before);
 }
 
 class MemoryReserveShortMemory : public ::testing::Test {
