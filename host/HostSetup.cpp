@@ -22,10 +22,8 @@ namespace {
 // A log whose reader is stuck must not hold up the end.
 constexpr std::chrono::milliseconds kLastWhileOfTheLog{500};
 
-// The listening socket: the one handed over, else the right to the one named.
-Result<ListenSocket> openSocket(const ServiceOptions& options) {
-  Result<ListenSocket> handedOver = ListenSocket::takeHandedOver();
-  if (handedOver.value || handedOver.failed()) return handedOver;
+// The right to the ordinary socket that is named.
+Result<ListenSocket> claimSocket(const ServiceOptions& options) {
   if (!options.socketPath) {
     return {{}, Error{0, "no socket: none was handed over, and neither --socket nor XDG_RUNTIME_DIR names one"}};
   }
@@ -34,6 +32,32 @@ Result<ListenSocket> openSocket(const ServiceOptions& options) {
     static_cast<void>(createDirectories(folder, 0750));  // binding tells when it failed
   }
   return ListenSocket::claim(*options.socketPath);
+}
+
+// The right to the admin socket; nothing when none is wanted.
+Result<ListenSocket> claimAdminSocket(const ServiceOptions& options, const ListenSocket& ordinary, bool isWanted) {
+  if (options.adminSocketPath) return ListenSocket::claim(*options.adminSocketPath);
+  if (!isWanted) return {};
+  const std::string path = ordinary.path();
+  if (path.empty()) return {{}, Error{0, "no admin socket: none was handed over, and --admin-socket names none"}};
+  return ListenSocket::claim(adminSocketPath(path));
+}
+
+// The listening sockets: those handed over, else the right to those named.
+Result<ListenSockets> openSockets(const ServiceOptions& options, bool separateAdmin) {
+  Result<ListenSockets> opened = ListenSocket::takeHandedOver();
+  ListenSockets& sockets = opened.value;
+  if (opened.ok() && !sockets.ordinary) {
+    Result<ListenSocket> claimed = claimSocket(options);
+    sockets.ordinary = std::move(claimed.value);
+    opened.error = std::move(claimed.error);
+  }
+  if (opened.ok() && !sockets.admin) {
+    Result<ListenSocket> claimed = claimAdminSocket(options, sockets.ordinary, separateAdmin);
+    sockets.admin = std::move(claimed.value);
+    opened.error = std::move(claimed.error);
+  }
+  return opened;
 }
 
 // The line on stderr, which there is too, has no identifier in the journal. Without a journal it is enough.
@@ -63,9 +87,9 @@ Status HostSetup::prepare(const ServiceOptions& options) {
     return Error{kExitFailure, prepared->text};
   }
   signals = std::make_shared<SignalSource>();
-  Result<ListenSocket> opened = openSocket(options);
+  Result<ListenSockets> opened = openSockets(options, configuration.access.separateAdmin);
   if (opened.failed()) return Error{kExitFailure, opened.error->text};
-  socket = std::move(opened.value);
+  sockets = std::move(opened.value);
   if (const Status held = holdStateDirectory(options.stateDirectory, stateLock_); held.failed()) {
     return Error{kExitFailure, held->text};
   }

@@ -49,8 +49,9 @@ class HostSetup {
   JsonDeviceProperties deviceProperties;
   // Blocked from here on; served once SignalSource::start() was called.
   std::shared_ptr<SignalSource> signals;
-  // Handed over, or claimed and not bound yet; the platform takes it.
-  ListenSocket socket;
+  // Handed over, or claimed and not bound yet; the platform takes them. There is an admin socket where one was handed
+  // over, named or is wanted by the configuration.
+  ListenSockets sockets;
   LinuxClock clock;
   // By what the log names sessions; the platform says where they go on from.
   LogSessionIds sessionIds;

@@ -8,10 +8,10 @@
 #include <cstdio>
 #include <cstdlib>
 #include <limits>
-#include <map>
 #include <string>
 #include <utility>
 
+#include "host/StatusParts.h"
 #include "host/log/PrefixedLog.h"
 #include "host/loop/Settling.h"
 #include "host/loop/WorkOwner.h"
@@ -61,25 +61,6 @@ recorder::RecorderOptions recorderOptions(const HostConfiguration& configuration
   return options;
 }
 
-plist::Dictionary expiredStatus(const std::map<recorder::Owner, std::uint64_t>& expired) {
-  plist::Dictionary status;
-  for (const auto& [owner, events] : expired) {
-    const std::string nobody = owner == recorder::kServiceItself ? "service" : "others";
-    const std::string name = owner >= 0 ? std::to_string(owner) : nobody;
-    status.set(std::string_view(name), events);
-  }
-  return status;
-}
-
-plist::Dictionary lossStatus() {
-  using Loss = MemoryReserve::Loss;
-  const MemoryReserve::Counts counts = MemoryReserve::counts();
-  return {{"requests_refused", counts.of(Loss::Request)},
-          {"connections_closed", counts.of(Loss::Connection)},
-          {"work_given_up", counts.of(Loss::Work)},
-          {"reserve_blocks_used", counts.blocksUsed}};
-}
-
 // What messages that wait on disk may take of it.
 std::size_t overflowShare(const recorder::RecorderOptions& options) {
   constexpr std::size_t kShare = 4;
@@ -101,6 +82,7 @@ LinuxPlatform::LinuxPlatform(const HostConfiguration& configuration, const std::
                              JsonDeviceProperties deviceProperties, Ground ground)
     : settleTime_(configuration.limits.settleTime),
       endTime_(configuration.limits.endTime),
+      separateAdmin_(configuration.access.separateAdmin),
       // Not the machine's own: the names in it are known beforehand, and nobody else is to be in the way.
       temporaryDirectory_(stateDirectory + "/tmp"),
       clock_(ground.clock),
@@ -231,21 +213,40 @@ Status LinuxPlatform::start() {
   return {};
 }
 
-Status LinuxPlatform::listen(ListenSocket socket, const std::shared_ptr<platform::ListenerDelegate>& delegate,
+Status LinuxPlatform::listen(ListenSockets sockets, const std::shared_ptr<platform::ListenerDelegate>& delegate,
                              ServiceCount serviceCounts) {
-  if (Status listening = socket.listen(); listening.failed()) {
+  serviceCounts_ = std::move(serviceCounts);
+  connections_.setStatusSource([this](auto onlyUser) { return status(onlyUser); });
+  Status listening = listenOn(std::move(sockets.ordinary), ListenSocket::kDefaultMode,
+                              separateAdmin_ ? Access::OwnSessions : Access::Everything, delegate);
+  if (listening.ok() && sockets.admin) {
+    listening = listenOn(std::move(sockets.admin), ListenSocket::kAdminMode, Access::Everything, delegate);
+  }
+  if (listening.failed()) {
     recorder_.shutdown();
     return listening;
   }
-  serviceCounts_ = std::move(serviceCounts);
-  connections_.setStatusSource([this] { return status(); });
-  listener_ = std::make_shared<SocketListener>(connections_, std::move(socket));
-  listener_->setDelegate(delegate);
-  listener_->resume();
+  for (const auto& listener : listeners_) {
+    listener->resume();
+  }
   serviceManager_.notifyReady();
   statusLine_.start();
   watchdog_.start();
   return {};
+}
+
+Status LinuxPlatform::listenOn(ListenSocket socket, mode_t mode, Access access,
+                               const std::shared_ptr<platform::ListenerDelegate>& delegate) {
+  if (Status listening = socket.listen(mode); listening.failed()) return listening;
+  listeners_.push_back(std::make_shared<SocketListener>(connections_, std::move(socket), access));
+  listeners_.back()->setDelegate(delegate);
+  return {};
+}
+
+void LinuxPlatform::closeListeners() {
+  for (const auto& listener : listeners_) {
+    listener->close();
+  }
 }
 
 void LinuxPlatform::reload() {
@@ -281,7 +282,7 @@ void LinuxPlatform::endClients(platform::UniqueFunction<void()> clientsAreGone) 
   });
   clientsAreGone_ = std::move(clientsAreGone);
   endDeadline_.start(endTime_);
-  listener_->close();
+  closeListeners();
   connections_.endInputs();
 }
 
@@ -346,16 +347,16 @@ void LinuxPlatform::exitProcess(int status) {
   std::_Exit(status);
 }
 
-plist::Dictionary LinuxPlatform::status() {
+plist::Dictionary LinuxPlatform::status(std::optional<std::uint32_t> onlyUser) {
   const recorder::RecorderCounters counters = recorder_.counters();
   plist::Dictionary status =
       connections_.ledger.status(serviceCounts_(), loop_.queue()->waiting() + workQueues_.unfinished(),
                                  {counters.handedOver, counters.committed, counters.waiting, counters.expired,
                                   counters.failed, counters.lostBefore});
   reload_.describe(status);
-  status.set("quotas", connections_.quotaUse());
+  status.set("quotas", connections_.quotaUse(onlyUser));
   status.set("out_of_memory", lossStatus());
-  status.set("recorder_expired_by_user", expiredStatus(recorder_.expiredByOwner()));
+  status.set("recorder_expired_by_user", expiredStatus(recorder_.expiredByOwner(), onlyUser));
   return status;
 }
 
@@ -364,7 +365,7 @@ void LinuxPlatform::end() {
   endDeadline_.cancel();  // of one that is killed while it ends
   serviceManager_.notifyStopping(kLongestCommit);
   watchdog_.stop();
-  listener_->close();
+  closeListeners();
   tryTo([this] { settleQueues(); });
   tryTo([this] { performanceTrace_.shutdown(); });  // a trace that isn't finished leaves no half file
   recorder_.shutdown();

@@ -106,7 +106,7 @@ class LinuxPlatform final : private platform::ProcessControl {
   // Lets clients connect, once whoever they are handed to is whole; then tells the service manager that it is ready and
   // begins to feed its watchdog. After a failure the recorder is shut down and the process can only end. The delegate
   // isn't held.
-  [[nodiscard]] Status listen(ListenSocket socket, const std::shared_ptr<platform::ListenerDelegate>& delegate,
+  [[nodiscard]] Status listen(ListenSockets sockets, const std::shared_ptr<platform::ListenerDelegate>& delegate,
                               ServiceCount serviceCounts);
   // Takes nobody and nothing more in, serves what each client had sent and then its end, calls `clientsAreGone` and
   // stops the loop. What isn't over by `HostLimits::endTime` is left: what the recorder holds is committed then and the
@@ -126,7 +126,11 @@ class LinuxPlatform final : private platform::ProcessControl {
   void exitProcess(int status) override;
   platform::Facilities facilitiesOf();
   // The ledger with the recorder's and the service's counts, what waits on all queues, and the quotas.
-  plist::Dictionary status();
+  plist::Dictionary status(std::optional<std::uint32_t> onlyUser);
+  // Makes the listener of a socket that is there.
+  Status listenOn(ListenSocket socket, mode_t mode, Access access,
+                  const std::shared_ptr<platform::ListenerDelegate>& delegate);
+  void closeListeners();
   // What a running service takes over of a configuration.
   void adopt(const HostConfiguration& configuration);
   StatusNumbers statusNumbers();
@@ -144,6 +148,7 @@ class LinuxPlatform final : private platform::ProcessControl {
   // Constant from the making on.
   const std::chrono::milliseconds settleTime_;
   const std::chrono::milliseconds endTime_;
+  const bool separateAdmin_;
   const std::string temporaryDirectory_;
   platform::Clock& clock_;
   platform::Log& log_;
@@ -199,7 +204,7 @@ class LinuxPlatform final : private platform::ProcessControl {
   ConfigurationReload reload_;
   // From listen() on.
   ServiceCount serviceCounts_;
-  std::shared_ptr<SocketListener> listener_;
+  std::vector<std::shared_ptr<SocketListener>> listeners_;
   platform::UniqueFunction<void()> clientsAreGone_;  // set while the clients' ends are served
   bool ending_ = false;
   MemoryReserve::Counts told_ = MemoryReserve::counts();

@@ -106,6 +106,22 @@ class TarnReportingServiceProtocol {
     static_cast<void>(reporterID);
     return false;
   }
+
+  // No remote operations either: this client's own sessions, for whoever lets others see only some clients'. Threads:
+  // the server queue's.
+  // The type of the one under the ID; nothing when there is none.
+  virtual std::optional<std::uint16_t> serviceTypeOf(std::int64_t reporterID) const {
+    static_cast<void>(reporterID);
+    return std::nullopt;
+  }
+  // Appends the IDs of at most so many, in the order of creation, those from the place `from` on; whether there may be
+  // more, from where `from` is then. 0 is the first place. Those that come meanwhile stand at the end.
+  virtual bool listReporterIDs(std::uint64_t& from, std::size_t atMost, std::vector<std::int64_t>& reporters) const {
+    static_cast<void>(from);
+    static_cast<void>(atMost);
+    static_cast<void>(reporters);
+    return false;
+  }
 };
 
 }  // namespace tarn::platform

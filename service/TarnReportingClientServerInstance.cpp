@@ -201,6 +201,20 @@ void TarnReportingClientServerInstance::killService() {
   });
 }
 
+std::optional<std::uint16_t> TarnReportingClientServerInstance::serviceTypeOf(std::int64_t reporterID) const {
+  const auto session = sessions_.find(reporterID);
+  return session ? std::optional(static_cast<std::uint16_t>(session->serviceType())) : std::nullopt;
+}
+
+bool TarnReportingClientServerInstance::listReporterIDs(std::uint64_t& from, std::size_t atMost,
+                                                        std::vector<std::int64_t>& reporters) const {
+  const std::size_t most = reporters.size() + atMost;
+  return !sessions_.forEachFrom(from, [&](std::int64_t reporterID) {
+    reporters.push_back(reporterID);
+    return reporters.size() < most;
+  });
+}
+
 void TarnReportingClientServerInstance::handleConnectionError() {
   onServerQueue([self = shared_from_this()] {
     const auto signpost = operation("handleConnectionError");

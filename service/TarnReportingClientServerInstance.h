@@ -95,6 +95,9 @@ class TarnReportingClientServerInstance : public platform::TarnReportingServiceP
   std::size_t logBytes() const override { return logAccount_ ? logAccount_->bytes : 0; }
   // Whether a further create under this ID would replace a session, and so needs no room for one more.
   bool hasSession(std::int64_t reporterID) const override { return sessions_.find(reporterID) != nullptr; }
+  // This client's own sessions, started or not.
+  std::optional<std::uint16_t> serviceTypeOf(std::int64_t reporterID) const override;
+  bool listReporterIDs(std::uint64_t& from, std::size_t atMost, std::vector<std::int64_t>& reporters) const override;
 
   // Ends the client: on the server queue, stops its started sessions, drops all of them and leaves the service's list.
   // A second call does nothing. Threads: any. Stopping goes on in slices, first the sessions that run, then the release

@@ -78,7 +78,8 @@ int serve(LinuxPlatform& platform, HostSetup& setup) {
   TarnReportingInstallFacilities(&platform.facilities());
   service = makeService(*setup.log);
   // Only now is there anything to connect to: who can reach the service finds it whole, its notifications heard.
-  const Status listening = platform.listen(std::move(setup.socket), service, [&service] { return countsOf(*service); });
+  const Status listening =
+      platform.listen(std::move(setup.sockets), service, [&service] { return countsOf(*service); });
   if (listening.failed()) return refuse(listening->text);
   StartWithoutMemory::over();
   platform.serve();

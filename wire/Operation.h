@@ -217,8 +217,7 @@ constexpr std::optional<Operation> operationFromName(std::string_view name) noex
   return row != kOperations.end() ? std::optional(row->operation) : std::nullopt;
 }
 
-// The domain of the errors that answer a frame which could be read but not served. The service's own errors have
-// another one, so a client can tell which of both refused.
+// The domain of the errors that answer a frame which could be read but not served; the service's own have another one.
 inline constexpr std::string_view kErrorDomain = "sys.oxbow.audio.reporting.ipc";
 
 // Codes of that domain. They stand in frames and are counted one by one in `status`.
@@ -233,15 +232,16 @@ enum class ErrorCode : std::uint8_t {
   OverQuota = 4,
   // The service has no memory for the request now. It may be sent again.
   OutOfMemory = 5,
+  // Only the admin socket serves it, since the service is set up so.
+  AdminOnly = 6,
 };
 // For tables by code, whose places are the codes less 1.
-inline constexpr std::size_t kErrorCodes = 5;
+inline constexpr std::size_t kErrorCodes = 6;
 
 // Containers inside each other, a dictionary argument being the first. Readers, writers and comparisons of values call
 // themselves once a level, so this bounds their stack.
 inline constexpr std::size_t kMaxNesting = 64;
-// Entries of a list of reporter IDs: each costs a look-up and may cost a copy of the message, so this bounds what one
-// frame may ask for.
+// Entries of a list of reporter IDs: each costs a look-up and may cost a copy of the message.
 inline constexpr std::size_t kMaxReporterIDs = 65536;
 // Bytes of the length that stands before each frame (little-endian).
 inline constexpr std::size_t kFrameHeaderBytes = 4;

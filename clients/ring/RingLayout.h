@@ -38,7 +38,8 @@
 enum tarnring_kind { TARNRING_FILLER = 1, TARNRING_FRAME = 2, TARNRING_MESSAGE = 3, TARNRING_GAP = 4 };
 
 /* Why a record was refused, as `last_refusal` tells it. The ring goes on after it. The first three are what a
- * frame's request is refused for, the fourth is a frame that is no request at all, the last two are about messages. */
+ * frame's request is refused for, the fourth is a frame that is no request at all, the two after it are about messages.
+ */
 enum tarnring_refusal {
   TARNRING_UNKNOWN_OPERATION = 1,
   TARNRING_BAD_ARGUMENTS = 2,
@@ -46,7 +47,8 @@ enum tarnring_refusal {
   TARNRING_UNREADABLE = 4,
   TARNRING_UNKNOWN_SHAPE = 5,
   TARNRING_BAD_VALUES = 6,
-  TARNRING_OUT_OF_MEMORY = 7
+  TARNRING_OUT_OF_MEMORY = 7,
+  TARNRING_ADMIN_ONLY = 8
 };
 
 /* The header. Each writer's numbers have cache lines of their own, so that neither side takes the other's line away

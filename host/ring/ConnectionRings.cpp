@@ -326,6 +326,7 @@ ConnectionRings::Step ConnectionRings::serveFrame(RingReader& reader, RingOwner&
   if (wire::rowOf(board_.request.operation).servedBy == wire::ServedBy::Host) {
     return refuseRecord(reader, record, TARNRING_UNKNOWN_OPERATION);
   }
+  if (!owner.mayAskFor(board_.request.operation)) return refuseRecord(reader, record, TARNRING_ADMIN_ONLY);
   return serveRequest(reader, owner, record);
 }
 

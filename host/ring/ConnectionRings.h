@@ -41,6 +41,8 @@ class RingOwner {
   virtual bool takesRingRequests() = 0;
   // Runs the work on the server queue after that of the requests that were served before.
   virtual void afterRingRequests(platform::Work work) = 0;
+  // Whether the client may ask for this at all.
+  virtual bool mayAskFor(wire::Operation operation) const noexcept = 0;
   // A checked request of the service, to which there is no reply. It may be moved from.
   virtual void serveRingRequest(wire::DecodedRequest& request) = 0;
   // Hands messages on as one piece of work, ahead of the connection's turn, until the run gives no more. False, and

@@ -9,7 +9,7 @@ namespace {
 
 constexpr std::array<std::string_view, kRingRefusals> kRefusalNames{
     "unknown_operation", "bad_arguments", "not_property_list", "unreadable",
-    "unknown_shape",     "bad_values",    "out_of_memory"};
+    "unknown_shape",     "bad_values",    "out_of_memory",     "admin_only"};
 
 struct FaultRow {
   std::string_view name;

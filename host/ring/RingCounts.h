@@ -25,7 +25,7 @@ enum class RingFault : std::uint8_t {
   Broken,   // open: positions or lengths that make no sense
 };
 inline constexpr std::size_t kRingFaults = 8;
-inline constexpr std::size_t kRingRefusals = TARNRING_OUT_OF_MEMORY;
+inline constexpr std::size_t kRingRefusals = TARNRING_ADMIN_ONLY;
 
 struct RingCounts {
   // Rings now; the others count since the start.

@@ -136,6 +136,14 @@ struct TakeFile {
   Status operator()(Node node, std::optional<std::string>& setting) const { return takePath(node, "a file", setting); }
 };
 
+struct TakeAdmin {
+  Status operator()(Node node, bool& separate) const {
+    const auto word = node.value_exact<std::string>();
+    separate = word == "separate";
+    return separate || word == "shared" ? Status() : wrong("must be \"shared\" or \"separate\"");
+  }
+};
+
 struct Setting {
   std::string_view section;
   std::string_view key;
@@ -189,6 +197,8 @@ constexpr std::array kSettings{
         Within<0, 3'600'000>()),
     setting(
         "snare", "refuse", kAtOnce, [](auto& host) -> auto& { return host.snare.refuse; }, Take()),
+    setting(
+        "access", "admin", kAtRestart, [](auto& host) -> auto& { return host.access.separateAdmin; }, TakeAdmin()),
     setting(
         "paths", "diagnostic_logs", kAtRestart, [](auto& host) -> auto& { return host.paths.diagnosticLogs; }, Take()),
     setting(

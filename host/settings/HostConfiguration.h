@@ -33,6 +33,11 @@ struct HostConfiguration {
     std::optional<platform::SnareReason> refuse;  // with what bug captures are refused; empty in the file: they aren't
     bool operator==(const Snare&) const = default;
   };
+  // [access]: what the clients of the ordinary socket may see and do.
+  struct Access {
+    bool separateAdmin = false;  // its own user's sessions alone, and not end the service; the admin socket is for that
+    bool operator==(const Access&) const = default;
+  };
   // [paths]: places outside the defaults. Each is taken as written: a relative one is the working directory's.
   struct Paths {
     std::optional<std::string> diagnosticLogs;  // the folder that holds DiagnosticLogs/; else the state directory
@@ -48,6 +53,7 @@ struct HostConfiguration {
   // [rtc]: how the stand-in for real-time-communication reporting answers.
   tarn::recorder::RecorderRtcReportingService::Behaviour rtc;
   Snare snare;
+  Access access;
   Paths paths;
   // [recorder]: whether there is one, and what it keeps.
   bool recorderEnabled = true;  // false: nothing stands in for the back-ends, and nothing is recorded

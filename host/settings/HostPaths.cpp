@@ -35,6 +35,10 @@ std::optional<std::string> defaultSocketPath(const HostEnvironment& environment)
   return environment.runtimeDirectory + "/tarnreporting.sock";
 }
 
+std::string adminSocketPath(const std::string& socketPath) {
+  return socketPath + "-admin";
+}
+
 std::vector<std::string> serviceSocketPaths(const HostEnvironment& environment) {
   if (!environment.serviceSocket.empty()) return {environment.serviceSocket};
   std::vector<std::string> paths;

@@ -26,6 +26,8 @@ struct HostEnvironment {
 
 // $XDG_RUNTIME_DIR/tarnreporting.sock, for root /run/tarnreporting/socket; nothing when there is no such variable.
 std::optional<std::string> defaultSocketPath(const HostEnvironment& environment);
+// The admin socket that belongs to an ordinary one: its path followed by "-admin".
+std::string adminSocketPath(const std::string& socketPath);
 // Where a client looks for the service, in this order: the place that the environment names, and then nothing else;
 // without that the user's and the system's. Never empty.
 std::vector<std::string> serviceSocketPaths(const HostEnvironment& environment);

@@ -14,9 +14,10 @@ namespace {
 constexpr const char* kProgram = "tarnreportingd";
 constexpr const char* kPurpose = "Gathers audio analytics: serves reporting sessions to the clients that connect.";
 constexpr const char* kFooter =
-    "The listener is the socket that the service manager hands over (LISTEN_FDS), else --socket. SIGTERM and SIGINT "
-    "end\n"
-    "each client and its sessions, then the service, once everything that it recorded is on disk.\n"
+    "The listener is the socket that the service manager hands over (LISTEN_FDS), else --socket; one that it names\n"
+    "admin is the admin socket. SIGTERM and SIGINT end each client and its sessions, then the service, once "
+    "everything\n"
+    "that it recorded is on disk.\n"
     "\n"
     "Exit status: 0 after SIGTERM, SIGINT, --help and --version; 1 when it can't serve (the state directory, the "
     "socket\n"
@@ -36,6 +37,11 @@ void addOptions(CLI::App& app, ServiceOptionTexts& raw) {
   app.add_option("--socket", raw.socketPath,
                  "Socket to listen on (default: $XDG_RUNTIME_DIR/tarnreporting.sock, for root "
                  "/run/tarnreporting/socket)")
+      ->type_name("PATH")
+      ->check(checkNotEmpty);
+  app.add_option("--admin-socket", raw.adminSocketPath,
+                 "Socket for its owner alone, over which everything is allowed (default: none, and with [access] admin "
+                 "= \"separate\" the socket's path followed by -admin)")
       ->type_name("PATH")
       ->check(checkNotEmpty);
   app.add_option("--state-dir", raw.stateDirectory,
@@ -107,6 +113,7 @@ ServiceCommand parseServiceCommand(int argumentCount, const char* const* argumen
   if (!stateDirectory) return refuse("--state-dir: must be given, neither XDG_STATE_HOME nor HOME names a folder");
   options.socketPath = raw.socketPath.empty() ? defaultSocketPath(environment) : std::optional(raw.socketPath);
   options.socketIsDefault = raw.socketPath.empty();
+  options.adminSocketPath = orNothing(raw.adminSocketPath);
   options.stateDirectory = *stateDirectory;
   options.configurationFile = orNothing(raw.configurationFile);
   options.defaultConfigurationFile = defaultConfigurationFile(environment);

@@ -28,6 +28,7 @@ inline constexpr int kExitConfiguration = 78;  // a wrong configuration or devic
 struct ServiceOptions {
   std::optional<std::string> socketPath;  // nothing: none named and no default, so the listener must be handed over
   bool socketIsDefault = false;           // then its folder is the service's own to make
+  std::optional<std::string> adminSocketPath;  // nothing: beside the socket, if the configuration wants one
   // Never empty: without the option and without a default the command line is wrong.
   std::string stateDirectory;
   // One that is named must be there.
@@ -52,6 +53,7 @@ struct ServiceCommand {
 // The options' values as they were written; empty: not given.
 struct ServiceOptionTexts {
   std::string socketPath;
+  std::string adminSocketPath;
   std::string stateDirectory;
   std::string configurationFile;
   std::string devicePropertiesFile;

@@ -19,6 +19,7 @@
 #include "host/socket/HostLimits.h"
 #include "host/socket/Ledger.h"
 #include "host/socket/Quotas.h"
+#include "host/socket/UserSessions.h"
 #include "host/system/MemoryReserve.h"
 #include "platform/Log.h"
 #include "platform/UniqueFunction.h"
@@ -39,11 +40,17 @@ class OpenConnection {
   virtual void leaveHost() noexcept = 0;
 };
 
+// What the clients of a socket may see and do.
+enum class Access : std::uint8_t {
+  Everything,
+  OwnSessions,  // sees its user's sessions alone, and doesn't end the service
+};
+
 class ConnectionHost {
  public:
   // Who answers `status`, and who says when everything is committed: the platform, which alone knows the service and
-  // the recorder.
-  using StatusSource = platform::UniqueFunction<plist::Dictionary()>;
+  // the recorder. With a user, the answer names that one and no other; its totals are the same.
+  using StatusSource = platform::UniqueFunction<plist::Dictionary(std::optional<std::uint32_t> onlyUser)>;
   using SettleSource = platform::UniqueFunction<void(platform::Work done)>;
 
   // Loop and log outlive the host, and the loop runs no more when the host ends: the turn's hooks and the queue's pause
@@ -71,8 +78,8 @@ class ConnectionHost {
   // holds up everybody.
   void setStatusSource(StatusSource source) { status_ = std::move(source); }
   // A dictionary of counts and levels of this moment, the rings' among them.
-  plist::Dictionary status() {
-    plist::Dictionary answer = status_ ? status_() : ledger.status(0, loop.queue()->waiting(), {});
+  plist::Dictionary status(std::optional<std::uint32_t> onlyUser = std::nullopt) {
+    plist::Dictionary answer = status_ ? status_(onlyUser) : ledger.status(0, loop.queue()->waiting(), {});
     rings.counts.describe(answer);
     return answer;
   }
@@ -98,13 +105,13 @@ class ConnectionHost {
     watchHalfFrames();
   }
 
-  // The quotas with what everybody has of them now; part of `status`.
-  plist::Dictionary quotaUse() {
+  // The quotas with what everybody has of them now, or only this user; part of `status`.
+  plist::Dictionary quotaUse(std::optional<std::uint32_t> onlyUser = std::nullopt) {
     shares.forEachParty([](ShareParty& party) { party.largestLog = 0; });
     for (OpenConnection* connection : open_) {
       connection->noteLogBytes();
     }
-    return quotaStatus(limits.quotas, shares);
+    return quotaStatus(limits.quotas, shares, onlyUser);
   }
 
   // How `settle` finds out that what was handed over so far is committed; `done` is work of the server queue then, and
@@ -160,6 +167,7 @@ class ConnectionHost {
   Ledger ledger;
   ConnectionGate gate;
   FairShares shares;
+  UserSessions sessions;
   ConnectionEnds ends;
   HalfFrames halfFrames;
   // After the loop and the log, on which it stands.
@@ -169,6 +177,8 @@ class ConnectionHost {
   wire::RequestDecoder decoder;
   wire::DecodedRequest request;
   wire::Refusal refusal;
+  // Of the next connection, on whichever socket it comes; no number is given twice.
+  std::uint64_t nextConnection = 1;
   // Whether replies to a client that has more requests waiting may be gathered over some turns, which saves system
   // calls; not at the end of the process, when there may be no further turn.
   bool gathersReplies = true;

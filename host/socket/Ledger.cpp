@@ -9,7 +9,7 @@ namespace tarn::linux_host {
 namespace {
 
 constexpr std::array<std::string_view, wire::kErrorCodes> kRefusalNames{
-    "unknown_operation", "bad_arguments", "not_property_list", "over_quota", "out_of_memory"};
+    "unknown_operation", "bad_arguments", "not_property_list", "over_quota", "out_of_memory", "admin_only"};
 constexpr std::array<std::string_view, kCutReasons> kCutNames{
     "unreadable_frame", "oversize_frame", "unread_replies", "half_frame", "stale_frame", "reset", "out_of_memory"};
 

@@ -8,11 +8,15 @@
 #include <sys/un.h>
 #include <systemd/sd-daemon.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <cstdio>
+#include <cstdlib>
 #include <cstring>
+#include <memory>
 #include <string_view>
+#include <vector>
 
 #include "host/system/SystemError.h"
 
@@ -41,6 +45,8 @@ Error isTaken(const std::string& path) {
 }
 
 constexpr std::string_view kLockSuffix = ".lock";
+// By which the service manager names the admin socket.
+constexpr std::string_view kAdminName = "admin";
 
 std::string lockPathOf(const std::string& path) {
   return path + std::string(kLockSuffix);
@@ -80,6 +86,20 @@ Status clearStale(const std::string& path, const sockaddr_un& address) {
   return {};
 }
 
+// The names of what was handed over, one for each descriptor in their order.
+Result<std::vector<std::string>> takeHandedOverNames() {
+  char** given = nullptr;
+  const int count = sd_listen_fds_with_names(1, &given);
+  if (count < 0) return {{}, errorOf("can't take the socket that was handed over", -count)};
+  const std::unique_ptr<char*, decltype(&std::free)> list(given, &std::free);
+  std::vector<std::string> names;
+  for (int index = 0; index < count; ++index) {
+    const std::unique_ptr<char, decltype(&std::free)> name(given[index], &std::free);
+    names.emplace_back(name.get());
+  }
+  return {std::move(names), {}};
+}
+
 }  // namespace
 
 ListenSocket::ListenSocket(ListenSocket&& other) noexcept {
@@ -117,23 +137,36 @@ void ListenSocket::close() noexcept {
   lock_.reset();
 }
 
-Result<ListenSocket> ListenSocket::takeHandedOver() {
-  Result<ListenSocket> result;
-  const int count = sd_listen_fds(1);
-  if (count == 0) return result;
-  if (count < 0) {
-    result.error = errorOf("can't take the socket that was handed over", -count);
-  } else if (count > 1) {
-    result.error = Error{0, std::to_string(count) + " sockets were handed over, one is expected"};
-  } else if (sd_is_socket_unix(SD_LISTEN_FDS_START, SOCK_STREAM, 1, nullptr, 0) <= 0) {
-    result.error = Error{0, "what was handed over is not a listening Unix stream socket"};
-  } else {
-    result.value.socket_ = UniqueDescriptor(SD_LISTEN_FDS_START);
-    result.value.name_ = "handed over";
-    const int flags = ::fcntl(SD_LISTEN_FDS_START, F_GETFL);
-    ::fcntl(SD_LISTEN_FDS_START, F_SETFL, flags | O_NONBLOCK);
+Result<ListenSockets> ListenSocket::takeHandedOver() {
+  Result<std::vector<std::string>> names = takeHandedOverNames();
+  if (names.failed()) return {{}, std::move(names.error)};
+  const auto admins = std::count(names.value.begin(), names.value.end(), kAdminName);
+  const auto ordinary = static_cast<std::ptrdiff_t>(names.value.size()) - admins;
+  if (ordinary > 1) return {{}, Error{0, std::to_string(ordinary) + " sockets were handed over, one is expected"}};
+  if (admins > 1) return {{}, Error{0, std::to_string(admins) + " admin sockets were handed over, one is expected"}};
+  ListenSockets sockets;
+  int descriptor = SD_LISTEN_FDS_START;
+  for (const std::string& name : names.value) {
+    if (sd_is_socket_unix(descriptor, SOCK_STREAM, 1, nullptr, 0) <= 0) {
+      return {{}, Error{0, "what was handed over is not a listening Unix stream socket"}};
+    }
+    const bool isAdmin = name == kAdminName;
+    ListenSocket& taken = isAdmin ? sockets.admin : sockets.ordinary;
+    taken.socket_ = UniqueDescriptor(descriptor);
+    taken.name_ = isAdmin ? "handed over as admin" : "handed over";
+    ::fcntl(descriptor, F_SETFL, ::fcntl(descriptor, F_GETFL) | O_NONBLOCK);
+    ++descriptor;
   }
-  return result;
+  return {std::move(sockets), {}};
+}
+
+std::string ListenSocket::path() const {
+  if (lock_) return name_;
+  sockaddr_un address{};
+  socklen_t size = sizeof address;
+  if (::getsockname(socket_.get(), reinterpret_cast<sockaddr*>(&address), &size) != 0) return {};
+  const std::string_view place(address.sun_path, sizeof address.sun_path);
+  return place.starts_with('/') ? std::string(place.substr(0, place.find('\0'))) : std::string();
 }
 
 Result<ListenSocket> ListenSocket::claim(const std::string& path) {

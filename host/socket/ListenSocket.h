@@ -17,10 +17,14 @@
 
 namespace tarn::linux_host {
 
+struct ListenSockets;
+
 class ListenSocket {
  public:
   // Owner and group may connect; who is in the group is for the installation to say.
   static constexpr mode_t kDefaultMode = 0660;
+  // Of the admin socket: its owner alone.
+  static constexpr mode_t kAdminMode = 0600;
 
   ListenSocket() = default;
   ListenSocket(ListenSocket&& other) noexcept;
@@ -31,10 +35,11 @@ class ListenSocket {
   // that was handed over stays with the service manager.
   ~ListenSocket();
 
-  // The socket that the service manager handed over (LISTEN_FDS), taken out of the environment, so that no child takes
-  // it for its own. Neither socket nor error when it handed over none; an error when it is more than one or not a
-  // listening Unix stream socket. To be called once, at the start.
-  static Result<ListenSocket> takeHandedOver();
+  // The sockets that the service manager handed over (LISTEN_FDS), taken out of the environment, so that no child takes
+  // them for its own. One of the name "admin" (LISTEN_FDNAMES) is the admin socket, one of any other name or without
+  // one the ordinary socket. Those that it didn't hand over are left empty, which is no error; it is one when there are
+  // two of a kind, or one that is not a listening Unix stream socket. To be called once, at the start.
+  static Result<ListenSockets> takeHandedOver();
   // The right to this path, which no other service gets from here on; a socket file that nobody listens on is removed.
   // Nothing is there to connect to before listen(). An error is one line that names the path: another service has it
   // (EADDRINUSE), it is longer than a socket's address may be, it is no socket, or its folder can't be written. Never
@@ -48,9 +53,11 @@ class ListenSocket {
   int descriptor() const noexcept { return socket_.get(); }
   // Whether there is one, claimed or listening.
   explicit operator bool() const noexcept { return socket_ || lock_; }
-  // "/run/x/socket", or "handed over".
+  // "/run/x/socket", "handed over" or "handed over as admin".
   // For log lines.
   const std::string& name() const noexcept { return name_; }
+  // Where clients find it; empty when it has no place in the file system.
+  std::string path() const;
 
  private:
   // What its end does, and another socket's taking its place.
@@ -61,6 +68,12 @@ class ListenSocket {
   std::string name_;
   dev_t device_ = 0;  // with the inode: which file is ours
   ino_t inode_ = 0;
+};
+
+// The sockets of a service; either may be missing.
+struct ListenSockets {
+  ListenSocket ordinary;
+  ListenSocket admin;  // its clients may always see and do everything
 };
 
 }  // namespace tarn::linux_host

@@ -26,7 +26,8 @@ bool beyondRate(MessageRate& rate, std::size_t limit, std::int64_t second) noexc
   return false;
 }
 
-plist::Dictionary quotaStatus(const HostLimits::Quotas& quotas, const FairShares& shares) {
+plist::Dictionary quotaStatus(const HostLimits::Quotas& quotas, const FairShares& shares,
+                              std::optional<std::uint32_t> onlyUser) {
   const plist::Dictionary limits{{"connections_per_user", quotas.connectionsPerUser},
                                  {"sessions_per_connection", quotas.sessionsPerConnection},
                                  {"sessions_per_user", quotas.sessionsPerUser},
@@ -38,7 +39,7 @@ plist::Dictionary quotaStatus(const HostLimits::Quotas& quotas, const FairShares
                                  {"messages_per_second_per_user", quotas.messagesPerSecondPerUser}};
   plist::Dictionary users;
   shares.forEachParty([&](const ShareParty& party) {
-    if (users.size() == kMostUsers) return;
+    if (users.size() == kMostUsers || party.user != onlyUser.value_or(party.user)) return;
     const plist::Dictionary use{{"connections", party.connections},
                                 {"sessions", party.sessions},
                                 {"waiting_bytes", party.waitingBytes},

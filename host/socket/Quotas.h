@@ -23,8 +23,9 @@ std::string overQuota(std::string_view quota, std::size_t use, std::size_t limit
 // with each second.
 bool beyondRate(MessageRate& rate, std::size_t limit, std::int64_t second) noexcept;
 
-// The bounds, and what each user that has connections has of them, at most 64 users; part of `status`. Keys of the
-// users are their uids in decimal.
-plist::Dictionary quotaStatus(const HostLimits::Quotas& quotas, const FairShares& shares);
+// The bounds, and what each user that has connections has of them, at most 64 users, or only the one that is named;
+// part of `status`. Keys of the users are their uids in decimal.
+plist::Dictionary quotaStatus(const HostLimits::Quotas& quotas, const FairShares& shares,
+                              std::optional<std::uint32_t> onlyUser = std::nullopt);
 
 }  // namespace tarn::linux_host

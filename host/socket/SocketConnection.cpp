@@ -11,6 +11,7 @@
 #include "host/log/LogFloodGuard.h"
 #include "host/log/PrefixedLog.h"
 #include "host/ring/ReceivedDescriptors.h"
+#include "host/socket/OwnSessionsView.h"
 #include "host/system/MemoryReserve.h"
 #include "platform/LogCondition.h"
 
@@ -35,10 +36,11 @@ ucred peerOf(const UniqueDescriptor& socket) {
 
 }  // namespace
 
-SocketConnection::SocketConnection(ConnectionHost& host, UniqueDescriptor socket, std::uint64_t number)
+SocketConnection::SocketConnection(ConnectionHost& host, UniqueDescriptor socket, std::uint64_t number, Access access)
     : ShareHolder(host.shares.partyOf(peerOf(socket).uid)),
       host_(host),
       socket_(std::move(socket)),
+      access_(access),
       client_{.connection = number},
       frames_(host.limits.maxFrameBytes),
       lane_(host.loop.queue().get()),
@@ -53,7 +55,11 @@ SocketConnection::SocketConnection(ConnectionHost& host, UniqueDescriptor socket
 SocketConnection::~SocketConnection() = default;
 
 void SocketConnection::setExportedObject(std::shared_ptr<platform::TarnReportingServiceProtocol> object) {
+  host_.sessions.add(user(), number(), object);
   object_ = std::move(object);
+  if (access_ == Access::OwnSessions) {
+    object_ = std::make_shared<OwnSessionsView>(std::move(object_), host_.sessions, user(), host_.loop.queue());
+  }
 }
 
 void SocketConnection::resume() {
@@ -371,11 +377,16 @@ void SocketConnection::finish(bool interrupted) {
   countSessions();
   --party().connections;
   // After what the handlers left to be done.
-  const bool waits = MemoryReserve::orGiveUp(
-      MemoryReserve::Loss::Work, [this] { host_.loop.queue()->asyncIn(lane_, [this] { host_.ends.finish(end_); }); });
+  const bool waits = MemoryReserve::orGiveUp(MemoryReserve::Loss::Work,
+                                             [this] { host_.loop.queue()->asyncIn(lane_, [this] { leave(); }); });
   if (!waits) {
-    host_.ends.finish(end_);
+    leave();
   }
+}
+
+void SocketConnection::leave() noexcept {
+  host_.sessions.remove(user(), number());
+  host_.ends.finish(end_);
 }
 
 }  // namespace tarn::linux_host

@@ -49,7 +49,8 @@ class SocketConnection final : public platform::Connection,
  public:
   // Takes over a connected socket that doesn't block. `number` names it in logs, from 1. The host outlives the
   // connection. Asks the kernel who the client is; nothing is received yet.
-  SocketConnection(ConnectionHost& host, UniqueDescriptor socket, std::uint64_t number);
+  SocketConnection(ConnectionHost& host, UniqueDescriptor socket, std::uint64_t number,
+                   Access access = Access::Everything);
   SocketConnection(const SocketConnection&) = delete;
   SocketConnection& operator=(const SocketConnection&) = delete;
   ~SocketConnection() override;
@@ -93,6 +94,9 @@ class SocketConnection final : public platform::Connection,
   void dropReply() override { output_.countDropped(); }
   void refuseForMemory(std::uint64_t id) noexcept override;
 
+  bool mayAskFor(wire::Operation operation) const noexcept override {
+    return access_ == Access::Everything || operation != wire::Operation::KillService;
+  }
   bool takesRingRequests() override { return object_ != nullptr && host_.takesFrom(&party()); }
   void serveRingRequest(wire::DecodedRequest& request) override;
   bool serveRingMessages(platform::MessageRun& run) override;
@@ -135,6 +139,10 @@ class SocketConnection final : public platform::Connection,
   void hold(wire::DecodedRequest& request, std::size_t frameBytes);
   // Answers once all that this connection sent before is committed.
   void settle(std::uint64_t id);
+  // Whose sessions it may see; nothing: everybody's.
+  std::optional<std::uint32_t> onlyUser() const noexcept {
+    return access_ == Access::OwnSessions ? std::optional(user()) : std::nullopt;
+  }
   // Why the request is beyond a quota; empty when it is not.
   std::string quotaRefusal(const wire::Request& request);
   void refuseRequest(std::uint64_t id, wire::ErrorCode code, std::string why) noexcept;
@@ -185,10 +193,12 @@ class SocketConnection final : public platform::Connection,
   void beginEnd(bool interrupted);
   // The handlers, the close, and the place of the end given back after what the handlers left to be done.
   void finish(bool interrupted);
+  void leave() noexcept;
 
   // What it stands in, who it is, and what is called at its end.
   ConnectionHost& host_;
   UniqueDescriptor socket_;
+  const Access access_;
   LogClient client_;
   std::string description_;
   // Only ever goes on to a later one.

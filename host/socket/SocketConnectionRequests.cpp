@@ -10,6 +10,7 @@ namespace tarn::linux_host {
 
 namespace {
 
+constexpr std::string_view kAdminOnly = "only over the admin socket";
 // Of an answer to `status`, in units of cost.
 constexpr std::size_t kStatusCost = 24;
 
@@ -43,11 +44,15 @@ void SocketConnection::takeRequest(wire::DecodedRequest& request, std::size_t fr
   if (request.operation == wire::Operation::Status) {
     // At once: whoever asks how the service is must not wait for its work.
     lane_.spend(kStatusCost);
-    sendReply(request.id, {host_.status()});
+    sendReply(request.id, {host_.status(onlyUser())});
     return;
   }
   if (!refusal_.empty()) {
     refuseRequest(request.id, wire::ErrorCode::OverQuota, refusal_);
+    return;
+  }
+  if (!mayAskFor(request.operation)) {
+    refuseRequest(request.id, wire::ErrorCode::AdminOnly, std::string(kAdminOnly));
     return;
   }
   if (!MemoryReserve::isWhole() && takesMemory(request.operation)) [[unlikely]] {

@@ -23,7 +23,8 @@ constexpr std::chrono::milliseconds kAcceptPause{50};
 
 }  // namespace
 
-SocketListener::SocketListener(ConnectionHost& host, ListenSocket socket) : host_(host), socket_(std::move(socket)) {}
+SocketListener::SocketListener(ConnectionHost& host, ListenSocket socket, Access access)
+    : host_(host), socket_(std::move(socket)), access_(access) {}
 
 SocketListener::~SocketListener() = default;
 
@@ -89,7 +90,7 @@ void SocketListener::take(UniqueDescriptor client) {
   if (std::exchange(shortage_, false)) {
     logPrefixed(host_.log, kHostCategory, platform::LogLevel::Default, kModule, "accepting clients again");
   }
-  const auto connection = std::make_shared<SocketConnection>(host_, std::move(client), nextNumber_++);
+  const auto connection = std::make_shared<SocketConnection>(host_, std::move(client), host_.nextConnection++, access_);
   const LogClientScope scope(connection->client());
   const auto delegate = delegate_.lock();
   const std::size_t limit = host_.limits.quotas.connectionsPerUser;

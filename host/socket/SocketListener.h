@@ -24,7 +24,7 @@ class SocketListener final : public platform::Listener,
  public:
   // The host outlives the listener. `socket` listens, or was claimed and will by the time of resume(). Held by shared
   // pointers alone.
-  SocketListener(ConnectionHost& host, ListenSocket socket);
+  SocketListener(ConnectionHost& host, ListenSocket socket, Access access = Access::Everything);
   SocketListener(const SocketListener&) = delete;
   SocketListener& operator=(const SocketListener&) = delete;
   ~SocketListener() override;
@@ -51,10 +51,9 @@ class SocketListener final : public platform::Listener,
 
   ConnectionHost& host_;
   ListenSocket socket_;
+  const Access access_;  // of all clients that come
   // The service; weak, as it may end before the listener.
   std::weak_ptr<platform::ListenerDelegate> delegate_;
-  // Of the next connection; no number is given twice.
-  std::uint64_t nextNumber_ = 1;
   // The loop watches the socket.
   bool accepting_ = false;
   bool shortage_ = false;  // logged, and nobody was accepted since

@@ -131,13 +131,26 @@ TEST_F(ConfigurationReloadTest, WhatNeedsARestartStaysAndIsNamedUntilItIsTakenBa
   EXPECT_EQ(waiting(), Names{});
 }
 
+TEST(SettingValues, AdminIsSharedOrSeparate) {
+  const auto read = [](const std::string& value) { return parseConfiguration("[access]\nadmin = " + value, "c.toml"); };
+  EXPECT_FALSE(HostConfiguration().access.separateAdmin);
+  EXPECT_FALSE(read("\"shared\"").value.access.separateAdmin);
+  EXPECT_TRUE(read("\"separate\"").value.access.separateAdmin);
+  for (const char* const wrong : {"\"\"", "\"Separate\"", "true", "1", "[\"separate\"]"}) {
+    EXPECT_EQ(read(wrong).error.text(), "c.toml:2: \"access.admin\" must be \"shared\" or \"separate\"") << wrong;
+  }
+  EXPECT_EQ(parseConfiguration("[access]\nadmins = 1", "c.toml").error.text(),
+            "c.toml:2: unknown key \"access.admins\"");
+}
+
 // Each setting is in force after a reload unless it waits for a restart, and then it is named.
 TEST(SettingEffects, EverySettingIsTakenOverOrWaits) {
   const std::map<std::string, std::string> others{
-      {"log.level", "\"debug\""},    {"tally.in_use", "[]"},
-      {"rtc.backends", "[]"},        {"rtc.no_backends", "true"},
-      {"rtc.available", "false"},    {"snare.refuse", "\"DailyLimitExceeded\""},
-      {"recorder.enabled", "false"}, {"recorder.redundant", "\"mark\""}};
+      {"log.level", "\"debug\""},      {"tally.in_use", "[]"},
+      {"rtc.backends", "[]"},          {"rtc.no_backends", "true"},
+      {"rtc.available", "false"},      {"snare.refuse", "\"DailyLimitExceeded\""},
+      {"recorder.enabled", "false"},   {"recorder.redundant", "\"mark\""},
+      {"access.admin", "\"separate\""}};
   for (const SettingDescription& setting : describedSettings()) {
     const std::string name = std::string(setting.section) + "." + std::string(setting.key);
     SCOPED_TRACE(name);

@@ -5,6 +5,8 @@
 #include <sys/stat.h>
 
 #include <filesystem>
+#include <fstream>
+#include <iterator>
 
 #include "tests/host/InChild.h"
 #include "tests/host/TemporaryFolder.h"
@@ -26,7 +28,7 @@ class HostSetupTest : public ::testing::Test {
     return testing::inChild([&] {
       HostSetup setup;
       const Status prepared = setup.prepare(options);
-      if (prepared.ok()) return setup.log && setup.socket && setup.signals ? 0 : 99;
+      if (prepared.ok()) return setup.log && setup.sockets.ordinary && setup.signals ? 0 : 99;
       return prepared->text == complaint ? static_cast<int>(prepared->code) : 99;
     });
   }
@@ -134,6 +136,38 @@ TEST_F(HostSetupTest, NoSocketIsRefused) {
   bad.socketPath.reset();
   EXPECT_EQ(statusOf(bad, "no socket: none was handed over, and neither --socket nor XDG_RUNTIME_DIR names one"),
             kExitFailure);
+}
+
+// The path of the admin socket that is claimed; "none" or the complaint.
+std::string adminPathOf(const ServiceOptions& options, const std::string& scratch) {
+  EXPECT_EQ(testing::inChild([&] {
+              HostSetup setup;
+              const Status prepared = setup.prepare(options);
+              std::ofstream(scratch) << (prepared.failed()     ? prepared->text
+                                         : setup.sockets.admin ? setup.sockets.admin.path()
+                                                               : "none");
+              return 0;
+            }),
+            0);
+  std::ifstream file(scratch);
+  return {std::istreambuf_iterator<char>(file), {}};
+}
+
+TEST_F(HostSetupTest, AdminSocketIsThereWhereItIsNamedOrTheConfigurationWantsIt) {
+  const auto path = [this](const ServiceOptions& given) { return adminPathOf(given, folder_.path("told")); };
+  ServiceOptions given = options();
+  EXPECT_EQ(path(given), "none");
+  given.adminSocketPath = folder_.path("named");
+  EXPECT_EQ(path(given), folder_.path("named"));
+  folder_.write("c.toml", "[access]\nadmin = \"separate\"\n");
+  given.configurationFile = folder_.path("c.toml");
+  EXPECT_EQ(path(given), folder_.path("named"));
+  given.adminSocketPath.reset();
+  EXPECT_EQ(path(given), folder_.path("socket-admin"));
+  folder_.write("c.toml", "[access]\nadmin = \"shared\"\n");
+  EXPECT_EQ(path(given), "none");
+  given.adminSocketPath = *given.socketPath;
+  EXPECT_EQ(path(given), "another service is listening on " + *given.socketPath);
 }
 
 TEST_F(HostSetupTest, FolderOfTheDefaultSocketIsMade) {

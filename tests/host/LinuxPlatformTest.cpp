@@ -69,7 +69,7 @@ class LinuxPlatformTest : public ::testing::Test {
     return *platform_;
   }
   std::string listen() {
-    return platform_->listen(ListenSocket::claim(socket()).value, service_, [] { return std::size_t{3}; }).text();
+    return platform_->listen({ListenSocket::claim(socket()).value, {}}, service_, [] { return std::size_t{3}; }).text();
   }
   void serve() {
     serving_ = std::thread([this] { platform_->serve(); });
@@ -229,7 +229,7 @@ TEST_F(LinuxPlatformTest, FailedListenCommitsWhatTheRecorderHoldsAndIsTold) {
   std::filesystem::create_directory(folder_.path("gone"));
   ListenSocket socket = ListenSocket::claim(folder_.path("gone/socket")).value;
   std::filesystem::remove_all(folder_.path("gone"));
-  EXPECT_NE(platform_->listen(std::move(socket), service_, [] { return std::size_t{0}; }).text(), "");
+  EXPECT_NE(platform_->listen({std::move(socket), {}}, service_, [] { return std::size_t{0}; }).text(), "");
   EXPECT_FALSE(manager_.ready);
   EXPECT_EQ(recorded(), (std::vector<std::string>{"wattlog event"}));
 }

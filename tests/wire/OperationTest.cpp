@@ -65,6 +65,7 @@ TEST(Operation, ErrorDomainAndCodesAreFixed) {
   EXPECT_EQ(static_cast<int>(ErrorCode::NotPropertyList), 3);
   EXPECT_EQ(static_cast<int>(ErrorCode::OverQuota), 4);
   EXPECT_EQ(static_cast<int>(ErrorCode::OutOfMemory), 5);
+  EXPECT_EQ(static_cast<int>(ErrorCode::AdminOnly), 6);
 }
 
 }  // namespace

@@ -7,6 +7,7 @@
 #include <atomic>
 #include <memory>
 #include <new>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -23,6 +24,7 @@ class NotingOwner : public linux_host::RingOwner {
  public:
   explicit NotingOwner(linux_host::MainLoop& loop) : loop_(loop) {}
   bool takesRingRequests() override { return takes; }
+  bool mayAskFor(wire::Operation operation) const noexcept override { return operation != refuses; }
   void serveRingRequest(wire::DecodedRequest& request) override {
     if (hasNoMemory) throw std::bad_alloc();
     if (watched != nullptr) {
@@ -61,6 +63,7 @@ class NotingOwner : public linux_host::RingOwner {
   std::atomic<bool> hasNoMemory{false};
   std::atomic<std::size_t> count{0};
   bool takesRuns = true;
+  std::optional<wire::Operation> refuses;
   std::int64_t mostOfRun = 1'000'000;  // messages of one run
   std::vector<std::size_t> runs;       // messages of each
   std::size_t announced = 0;           // messages of runs

@@ -67,6 +67,7 @@ TEST(ServiceOptions, DefaultsFollowTheUsersFolders) {
   ASSERT_TRUE(command.options);
   EXPECT_EQ(command.options->socketPath, "/run/user/7/tarnreporting.sock");
   EXPECT_EQ(command.options->stateDirectory, "/srv/u/state/tarnreporting");
+  EXPECT_EQ(command.options->adminSocketPath, std::nullopt);
   EXPECT_FALSE(command.options->configurationFile);
   EXPECT_FALSE(command.options->devicePropertiesFile);
   EXPECT_EQ(command.options->logLevel, std::nullopt);
@@ -91,11 +92,12 @@ TEST(ServiceOptions, UnsetAndRelativeVariablesDoNotCount) {
 }
 
 TEST(ServiceOptions, EveryOptionIsTaken) {
-  const ServiceCommand command = parse({"--socket", "/s", "--state-dir=/d", "--config", "c", "--device-properties", "p",
-                                        "--log-level", "debug", "--log-target", "journal"});
+  const ServiceCommand command = parse({"--socket", "/s", "--admin-socket", "/a", "--state-dir=/d", "--config", "c",
+                                        "--device-properties", "p", "--log-level", "debug", "--log-target", "journal"});
   ASSERT_TRUE(command.options);
   EXPECT_EQ(command.options->socketPath, "/s");
   EXPECT_FALSE(command.options->socketIsDefault);
+  EXPECT_EQ(command.options->adminSocketPath, "/a");
   EXPECT_EQ(command.options->stateDirectory, "/d");
   EXPECT_EQ(command.options->configurationFile, "c");
   EXPECT_EQ(command.options->devicePropertiesFile, "p");
@@ -117,12 +119,26 @@ TEST(ServiceOptions, HelpNamesEveryOptionDefaultAndExitStatus) {
   const ServiceCommand command = parse({"--help"});
   EXPECT_FALSE(command.options);
   EXPECT_TRUE(command.usage.ok());
-  for (const char* part :
-       {"--socket PATH", "--state-dir DIR", "--config FILE", "--device-properties FILE", "--log-level LEVEL",
-        "--log-target stderr|journal|FILE", "--version", "--help", "$XDG_RUNTIME_DIR/tarnreporting.sock",
-        "/run/tarnreporting/socket", "$XDG_STATE_HOME/tarnreporting", "/var/lib/tarnreporting", "LISTEN_FDS",
-        "debug, info, default or error", "Exit status: 0", "64 for wrong usage", "78 for a wrong configuration",
-        "1 when it can't serve", "2 when a client ended it"}) {
+  for (const char* part : {"--socket PATH",
+                           "--admin-socket PATH",
+                           "--state-dir DIR",
+                           "--config FILE",
+                           "--device-properties FILE",
+                           "--log-level LEVEL",
+                           "--log-target stderr|journal|FILE",
+                           "--version",
+                           "--help",
+                           "$XDG_RUNTIME_DIR/tarnreporting.sock",
+                           "/run/tarnreporting/socket",
+                           "$XDG_STATE_HOME/tarnreporting",
+                           "/var/lib/tarnreporting",
+                           "LISTEN_FDS",
+                           "debug, info, default or error",
+                           "Exit status: 0",
+                           "64 for wrong usage",
+                           "78 for a wrong configuration",
+                           "1 when it can't serve",
+                           "2 when a client ended it"}) {
     EXPECT_NE(command.output.find(part), std::string::npos) << part;
   }
 }

@@ -19,7 +19,8 @@ TEST(Ledger, StatusHasEveryMemberFromTheStart) {
     EXPECT_EQ(status.get(member), plist::ValueView(0)) << member;
   }
   EXPECT_EQ(plist::description(status.get("requests_refused")),
-            "{unknown_operation = 0; bad_arguments = 0; not_property_list = 0; over_quota = 0; out_of_memory = 0}");
+            "{unknown_operation = 0; bad_arguments = 0; not_property_list = 0; over_quota = 0; out_of_memory = 0; "
+            "admin_only = 0}");
   EXPECT_EQ(plist::description(status.get("connections_cut")),
             "{unreadable_frame = 0; oversize_frame = 0; unread_replies = 0; half_frame = 0; stale_frame = 0; reset = "
             "0; out_of_memory = 0}");
@@ -44,7 +45,8 @@ TEST(Ledger, CountsRefusalsAndCutsByReason) {
   ledger.countCut(CutReason::UnreadReplies);
   const auto status = ledger.status(0, 0, {});
   EXPECT_EQ(plist::description(status.get("requests_refused")),
-            "{unknown_operation = 0; bad_arguments = 2; not_property_list = 0; over_quota = 0; out_of_memory = 0}");
+            "{unknown_operation = 0; bad_arguments = 2; not_property_list = 0; over_quota = 0; out_of_memory = 0; "
+            "admin_only = 0}");
   EXPECT_EQ(plist::description(status.get("connections_cut")),
             "{unreadable_frame = 0; oversize_frame = 0; unread_replies = 1; half_frame = 0; stale_frame = 0; reset = "
             "0; out_of_memory = 0}");

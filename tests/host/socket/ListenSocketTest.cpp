@@ -182,7 +182,8 @@ int takeInChild(int descriptor, const char* count) {
     if (::getenv("LISTEN_FDS") != nullptr) {
       return 1;  // a child of the service would take the socket for its own
     }
-    if (result.value) {
+    if (result.value.admin) return 3;
+    if (result.value.ordinary) {
       const bool blocks = (::fcntl(3, F_GETFL) & O_NONBLOCK) == 0;
       const bool inherited = (::fcntl(3, F_GETFD) & FD_CLOEXEC) == 0;
       return blocks || inherited ? 2 : static_cast<int>(kTaken);
@@ -208,23 +209,83 @@ TEST_F(ListenSocketTest, TakesNothingWhenNothingWasHandedOver) {
   EXPECT_EQ(testing::inChild([] {
               ::unsetenv("LISTEN_FDS");
               const auto result = ListenSocket::takeHandedOver();
-              return !result.value && result.ok() ? 0 : 1;
+              return !result.value.ordinary && !result.value.admin && result.ok() ? 0 : 1;
             }),
             0);
 }
 
-TEST_F(ListenSocketTest, RefusesMoreThanOneSocket) {
-  const auto socket = boundSocket(path_);
-  ASSERT_EQ(::listen(socket.get(), 5), 0);
+// What comes of sockets of these names, which listen at "NUMBER" in the folder, from 0 on: "error", or the places of
+// the ordinary and of the admin socket.
+std::string handedOver(const testing::ScratchFolder& folder, const std::string& names, int count) {
+  int tell[2];
+  EXPECT_EQ(::pipe(tell), 0);
   EXPECT_EQ(testing::inChild([&] {
-              ::dup2(socket.get(), 3);
-              ::dup2(socket.get(), 4);
-              ::setenv("LISTEN_FDS", "2", 1);
+              ::dup2(tell[1], 30);
+              std::vector<UniqueDescriptor> sockets;
+              for (int index = 0; index < count; ++index) {
+                sockets.push_back(boundSocket(folder.file(std::to_string(index))));
+                ::listen(sockets.back().get(), 5);
+                ::dup2(sockets.back().get(), 20 + index);
+              }
+              for (int index = 0; index < count; ++index) {
+                ::dup2(20 + index, 3 + index);
+              }
+              ::setenv("LISTEN_FDS", std::to_string(count).c_str(), 1);
               ::setenv("LISTEN_PID", std::to_string(::getpid()).c_str(), 1);
-              return ListenSocket::takeHandedOver().error.text() == "2 sockets were handed over, one is expected" ? 0
-                                                                                                                  : 1;
+              ::unsetenv("LISTEN_FDNAMES");
+              if (!names.empty()) {
+                ::setenv("LISTEN_FDNAMES", names.c_str(), 1);
+              }
+              const auto taken = ListenSocket::takeHandedOver();
+              const auto placeOf = [](const ListenSocket& socket) {
+                return socket ? socket.path().substr(socket.path().rfind('/') + 1) : std::string("none");
+              };
+              const std::string text =
+                  taken.failed() ? taken.error->text : placeOf(taken.value.ordinary) + " " + placeOf(taken.value.admin);
+              return ::write(30, text.data(), text.size()) > 0 && ::getenv("LISTEN_FDNAMES") == nullptr ? 0 : 1;
             }),
             0);
+  std::string text(200, '\0');
+  text.resize(static_cast<std::size_t>(std::max<ssize_t>(::read(tell[0], text.data(), text.size()), 0)));
+  ::close(tell[0]);
+  ::close(tell[1]);
+  return text;
+}
+
+TEST_F(ListenSocketTest, TheAdminSocketIsTheOneOfThatName) {
+  EXPECT_EQ(handedOver(folder_, "socket:admin", 2), "0 1");
+}
+
+TEST_F(ListenSocketTest, TheAdminSocketMayComeFirst) {
+  EXPECT_EQ(handedOver(folder_, "admin:tarnreportingd.socket", 2), "1 0");
+}
+
+TEST_F(ListenSocketTest, TheAdminSocketMayComeAlone) {
+  EXPECT_EQ(handedOver(folder_, "admin", 1), "none 0");
+}
+
+TEST_F(ListenSocketTest, ASocketWithoutANameIsTheOrdinaryOne) {
+  EXPECT_EQ(handedOver(folder_, "", 1), "0 none");
+}
+
+TEST_F(ListenSocketTest, ANameThatOnlyBeginsSoIsNotTheAdmins) {
+  EXPECT_EQ(handedOver(folder_, "administration", 1), "0 none");
+}
+
+TEST_F(ListenSocketTest, RefusesTwoOfAKind) {
+  EXPECT_EQ(handedOver(folder_, "", 2), "2 sockets were handed over, one is expected");
+}
+
+TEST_F(ListenSocketTest, RefusesTwoOrdinaryOnesBesideAnAdminSocket) {
+  EXPECT_EQ(handedOver(folder_, "one:admin:two", 3), "2 sockets were handed over, one is expected");
+}
+
+TEST_F(ListenSocketTest, RefusesTwoAdminSockets) {
+  EXPECT_EQ(handedOver(folder_, "admin:socket:admin", 3), "2 admin sockets were handed over, one is expected");
+}
+
+TEST_F(ListenSocketTest, RefusesNamesThatAreNotAsMany) {
+  EXPECT_NE(handedOver(folder_, "admin", 2).find("can't take the socket that was handed over"), std::string::npos);
 }
 
 TEST_F(ListenSocketTest, RefusesAHandedOverSocketThatDoesNotListen) {

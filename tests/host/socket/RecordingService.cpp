@@ -97,6 +97,11 @@ class RecordingService::Client final : public platform::TarnReportingServiceProt
     return found == service_.logBytes.end() ? 0 : found->second;
   }
   bool hasSession(std::int64_t reporterID) const override { return sessions_.contains(reporterID); }
+  bool listReporterIDs(std::uint64_t& /*from*/, std::size_t /*atMost*/,
+                       std::vector<std::int64_t>& reporters) const override {
+    reporters.insert(reporters.end(), sessions_.begin(), sessions_.end());
+    return false;
+  }
 
  private:
   void stopInSlices(std::int64_t reporterID, int left, platform::Acknowledge reply) {

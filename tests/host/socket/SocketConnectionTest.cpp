@@ -174,7 +174,7 @@ TEST_F(SocketConnectionTest, StatusIsAnsweredByTheHost) {
 }
 
 TEST_F(SocketConnectionTest, StatusIsWhatTheStatusSourceComposes) {
-  running_.onQueue([this] { host_->setStatusSource([] { return plist::Dictionary{{"sessions", 42}}; }); });
+  running_.onQueue([this] { host_->setStatusSource([](auto) { return plist::Dictionary{{"sessions", 42}}; }); });
   TestClient client(path_);
   const auto status = client.status();
   ASSERT_TRUE(status);

@@ -23,13 +23,13 @@ namespace tarn::testing {
 
 class SocketFixture : public ::testing::Test {
  protected:
-  // `limits` are set by tests before serve().
+  // `limits` and `access` are set by tests before serve().
   void serve() {
     host_ = std::make_unique<linux_host::ConnectionHost>(running_.loop, log_, limits);
     host_->gate.setPauseSource([this] { return paused.load(); });
     auto socket = bindTo(path_);
     ASSERT_EQ(socket.error.text(), "");
-    listener_ = std::make_shared<linux_host::SocketListener>(*host_, std::move(socket.value));
+    listener_ = std::make_shared<linux_host::SocketListener>(*host_, std::move(socket.value), access);
     listener_->setDelegate(service_);
     listener_->resume();
     running_.start();
@@ -70,6 +70,7 @@ class SocketFixture : public ::testing::Test {
   }
 
   linux_host::HostLimits limits;
+  linux_host::Access access = linux_host::Access::Everything;
   std::atomic<bool> paused{false};
   ScratchFolder folder_;
   const std::string path_ = folder_.file("socket");
