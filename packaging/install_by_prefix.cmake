@@ -11,7 +11,7 @@ else()
 endif()
 # An address, in which a unit's own sign for what it fills in is doubled.
 string(REPLACE " " "%%20" TARN_DOC_URL "file:${prefix}/${TARN_DOC_DIR}")
-foreach(unit tarnreportingd.service tarnreportingd.socket)
+foreach(unit tarnreportingd.service tarnreportingd.socket tarnreportingd-admin.socket)
   configure_file("${TARN_PACKAGING}/systemd/${unit}.in" "${TARN_SCRATCH}/${unit}" @ONLY)
   file(INSTALL "${TARN_SCRATCH}/${unit}" DESTINATION "${prefix}/${TARN_UNIT_DIR}")
 endforeach()
@@ -19,5 +19,6 @@ endforeach()
 configure_file("${TARN_PACKAGING}/systemd/user/tarnreportingd.service.in" "${TARN_SCRATCH}/user/tarnreportingd.service"
   @ONLY)
 file(INSTALL "${TARN_SCRATCH}/user/tarnreportingd.service" "${TARN_PACKAGING}/systemd/user/tarnreportingd.socket"
+  "${TARN_PACKAGING}/systemd/user/tarnreportingd-admin.socket"
   DESTINATION "${prefix}/${TARN_USER_UNIT_DIR}")
 file(INSTALL "${TARN_PACKAGING}/tarnreportingd.toml" DESTINATION "${configuration}/tarnreporting")

@@ -41,6 +41,9 @@ std::vector<Check> checkAll(const CheckSubject& subject) {
   checks.push_back(checkSpace(options.stateDirectory, configuration));
   checks.push_back(checkSocketDirectory(subject));
   checks.push_back(checkSocket(subject));
+  if (configuration.access.separateAdmin) {
+    checks.push_back(checkAdminSocket(subject));
+  }
   checks.push_back(checkUnit(subject));
   return checks;
 }

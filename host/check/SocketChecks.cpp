@@ -62,6 +62,11 @@ std::string whySilent(const std::string& path) {
   return size >= 7 && std::string_view(answer.data() + 4, 3) == "\x83\x01\xf6"sv ? "" : "no answer of a service";
 }
 
+// A service that made its socket by itself holds the lock beside it.
+std::string lockOf(const std::string& path) {
+  return path + ".lock";
+}
+
 }  // namespace
 
 Check checkSocketDirectory(const CheckSubject& subject) {
@@ -92,14 +97,13 @@ Check checkSocketDirectory(const CheckSubject& subject) {
   return bad(name, what + errorSuffix(error) + "; give it to the service's user");
 }
 
-Check checkSocket(const CheckSubject& subject) {
-  const char* const name = "socket";
-  if (subject.isHandedOver) return good(name, "handed over by the service manager");
-  if (!subject.options.socketPath) return bad(name, "none is named; name one with --socket");
-  const std::string& path = *subject.options.socketPath;
+namespace {
+
+// What is to be said of the socket at a path that `option` names.
+Check checkSocketAt(const char* name, const std::string& path, const std::string& option, const CheckSubject& subject) {
   if (path.size() >= sizeof sockaddr_un{}.sun_path) {
     return bad(name, path + " is longer than the " + std::to_string(sizeof sockaddr_un{}.sun_path - 1) +
-                         " bytes of a socket's address; name a shorter one with --socket");
+                         " bytes of a socket's address; name a shorter one with " + option);
   }
   struct stat status {};
   if (::lstat(path.c_str(), &status) != 0) {
@@ -107,17 +111,42 @@ Check checkSocket(const CheckSubject& subject) {
     if (error == ENOENT) return good(name, path + " isn't there, the service makes it");
     return bad(name, path + errorSuffix(error) + "; mend its folder");
   }
-  if (!S_ISSOCK(status.st_mode)) return bad(name, path + " is no socket; remove it, or name another with --socket");
+  if (!S_ISSOCK(status.st_mode)) return bad(name, path + " is no socket; remove it, or name another with " + option);
   if (!isListenedOn(path)) return good(name, path + " is stale, the service replaces it");
-  // A service that made its socket by itself holds the lock beside it.
-  const pid_t holder = lockHolder(path + ".lock");
+  const pid_t holder = lockHolder(lockOf(path));
   if (holder == 0 && !subject.unitFolders.empty()) return good(name, path + " is the service manager's");
   const std::string why = whySilent(path);
   if (!why.empty()) {
     return bad(name, path + " is taken by " + (holder > 0 ? "process " + std::to_string(holder) : "another program") +
-                         ": " + why + "; end it, or name another with --socket");
+                         ": " + why + "; end it, or name another with " + option);
   }
   return good(name, path + " answers" + (holder > 0 ? ", process " + std::to_string(holder) : ""));
+}
+
+bool isTheManagers(const std::string& path, const CheckSubject& subject) {
+  return !subject.unitFolders.empty() && isListenedOn(path) && lockHolder(lockOf(path)) == 0;
+}
+
+}  // namespace
+
+Check checkSocket(const CheckSubject& subject) {
+  const char* const name = "socket";
+  if (subject.isHandedOver) return good(name, "handed over by the service manager");
+  if (!subject.options.socketPath) return bad(name, "none is named; name one with --socket");
+  return checkSocketAt(name, *subject.options.socketPath, "--socket", subject);
+}
+
+Check checkAdminSocket(const CheckSubject& subject) {
+  const char* const name = "admin-socket";
+  const ServiceOptions& options = subject.options;
+  if (subject.isHandedOver) return good(name, "handed over by the service manager");
+  if (!options.adminSocketPath && !options.socketPath) return bad(name, "none is named; name one with --admin-socket");
+  const std::string path = options.adminSocketPath.value_or(adminSocketPath(options.socketPath.value_or("")));
+  if (options.socketPath && isTheManagers(*options.socketPath, subject) && !isListenedOn(path)) {
+    return bad(name, path + " isn't the service manager's, as " + *options.socketPath +
+                         " is; systemctl enable --now tarnreportingd-admin.socket");
+  }
+  return checkSocketAt(name, path, "--admin-socket", subject);
 }
 
 }  // namespace tarn::linux_host

@@ -15,6 +15,7 @@ import unittest
 PROGRAMS = ("tarnreportingd", "tarnreportingctl")
 FILES = (
     "lib/systemd/system/tarnreportingd.service", "lib/systemd/system/tarnreportingd.socket",
+    "lib/systemd/system/tarnreportingd-admin.socket", "lib/systemd/user/tarnreportingd-admin.socket",
     "lib/systemd/user/tarnreportingd.service", "lib/systemd/user/tarnreportingd.socket",
     "share/bash-completion/completions/tarnreportingd", "share/zsh/site-functions/_tarnreportingctl",
     "share/fish/vendor_completions.d/tarnreportingctl.fish",
@@ -118,6 +119,12 @@ class InstalledTree(unittest.TestCase):
         with open(self.at("lib/sysusers.d/tarnreporting.conf"), encoding="utf-8") as file:
             self.assertIn("u " + service["User"][0] + " ", file.read())
         self.assertEqual(sockets["SocketUser"], service["User"])
+        # Root's alone, and known to the service by its name.
+        admin = self.settings("lib/systemd/system/tarnreportingd-admin.socket")
+        self.assertEqual((admin["ListenStream"], admin["SocketMode"], admin["SocketUser"], admin["FileDescriptorName"]),
+                         (["/run/tarnreporting/socket-admin"], ["0600"], ["root"], ["admin"]))
+        self.assertEqual(admin["Service"], ["tarnreportingd.service"])
+        self.assertEqual(service["Sockets"], ["tarnreportingd.socket tarnreportingd-admin.socket"])
 
     def adapter_settings(self, name):
         """Of its unit, which comes with it; none where the adapter isn't there."""
@@ -165,7 +172,8 @@ class InstalledTree(unittest.TestCase):
 
     @unittest.skipUnless(shutil.which("systemd-analyze"), "systemd-analyze is not installed here")
     def test_the_manager_has_nothing_to_say_about_the_units(self):
-        units = [self.at("lib/systemd/system/tarnreportingd." + kind) for kind in ("service", "socket")]
+        units = [self.at("lib/systemd/system/tarnreportingd" + kind)
+                 for kind in (".service", ".socket", "-admin.socket")]
         done = run("systemd-analyze", "verify", "--man=no", *units)
         self.assertEqual((done.returncode, done.stdout, done.stderr), (0, "", ""))
 
@@ -178,12 +186,15 @@ class InstalledTree(unittest.TestCase):
     def test_a_users_own_service_is_where_that_users_clients_look(self):
         sockets = self.settings("lib/systemd/user/tarnreportingd.socket")
         self.assertEqual((sockets["ListenStream"], sockets["SocketMode"]), (["%t/tarnreporting.sock"], ["0600"]))
+        admin = self.settings("lib/systemd/user/tarnreportingd-admin.socket")
+        self.assertEqual((admin["ListenStream"], admin["SocketMode"], admin["FileDescriptorName"]),
+                         (["%t/tarnreporting.sock-admin"], ["0600"], ["admin"]))
         service = self.settings("lib/systemd/user/tarnreportingd.service")
         self.assertEqual(shlex.split(service["ExecStart"][0]),
                          [self.at("bin/tarnreportingd"), "--log-target", "journal"])
         system = self.settings("lib/systemd/system/tarnreportingd.service")
         for same in ("Type", "WatchdogSec", "Restart", "SuccessExitStatus", "RestartPreventExitStatus",
-                     "TimeoutStopSec"):
+                     "TimeoutStopSec", "Sockets"):
             self.assertEqual(service[same], system[same], same)
 
     def test_programs_tell_their_version_and_which_build_they_are(self):

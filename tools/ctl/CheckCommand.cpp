@@ -68,8 +68,8 @@ int checkInstallation(const Context& context, bool asJson) {
   options.stateDirectory = context.stateDirectory;
   options.socketPath = linux_host::defaultSocketPath(environment);
   // One that an option or a variable names stands alone.
-  if (context.socket.sockets.size() == 1) {
-    options.socketPath = context.socket.sockets.front();
+  if (!context.ordinarySocket.empty()) {
+    options.socketPath = context.ordinarySocket;
   }
   options.socketIsDefault = options.socketPath == linux_host::defaultSocketPath(environment);
   options.defaultConfigurationFile = linux_host::defaultConfigurationFile(environment);
@@ -99,7 +99,8 @@ void addCheckCommand(CLI::App& app, Context& context) {
   command->add_flag("--json", *asJson, "Print one JSON object a line")->excludes(storeFlag);
   command->footer(
       "\nPrints one line, good or bad with what to do, for each of configuration, device properties, state directory,\n"
-      "store, space, socket directory, socket and unit. Exit status 0 only when all are good.\n\n"
+      "store, space, socket directory, socket, admin socket (where there is to be one) and unit. Exit status 0 only\n"
+      "when all are good.\n\n"
       "With --store prints how many events are whole, then one line for each range of ids that isn't: lost, "
       "noted-lost\n"
       "(the recorder knows) or unproven (the event is there, its checksum is damaged); and for ids of rows of "

@@ -25,6 +25,7 @@ namespace tarn::ctl {
 // directory, and `lint` and `explain` need neither.
 struct Context {
   ServiceAddress socket;       // of the service
+  std::string ordinarySocket;  // when there is only one place where the service may be, whichever socket is talked to
   std::string stateDirectory;  // of the service
   Terminal terminal = {};      // how results may look
   std::function<int()> chosen;

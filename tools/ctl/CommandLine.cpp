@@ -29,6 +29,10 @@ void describeCommandLine(CLI::App& app, Context& context, Options& options, cons
   app.add_option("--socket", options.socket,
                  "The service's socket (default: $TARNREPORTING_SOCKET, else the user's, else the system's)")
       ->type_name("PATH");
+  app.add_flag(
+      "--admin", options.admin,
+      "Talk to the admin socket, which is the service's followed by -admin: only there may the service be ended, "
+      "and others' sessions be seen, when it is set up so");
   app.add_option("--timeout", options.timeout, "How many seconds an answer may take (default: 5); then 69")
       ->type_name("S")
       ->check([](const std::string& text) { return checkSeconds(text, 0.001, kLongestSeconds); });

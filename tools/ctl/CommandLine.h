@@ -15,6 +15,7 @@ namespace tarn::ctl {
 // What all commands take, beside what Context holds.
 struct Options {
   std::string socket;
+  bool admin = false;
   double timeout = 5;
   std::optional<double> wait;
   std::string color = "auto";

@@ -29,6 +29,13 @@ bool nobodyListens(std::int64_t errorNumber) {
   return errorNumber == ENOENT || errorNumber == ECONNREFUSED || errorNumber == ENOTDIR;
 }
 
+// What to do about it, for an error whose text doesn't say so.
+std::string hintOf(const client::RemoteError& error) {
+  const bool isAdminOnly =
+      error.domain == wire::kErrorDomain && error.code == static_cast<std::int64_t>(wire::ErrorCode::AdminOnly);
+  return isAdminOnly ? " (give --admin)" : "";
+}
+
 }  // namespace
 
 std::string silenceText(const std::string& socket, milliseconds timeout) {
@@ -100,7 +107,7 @@ Answer askService(const ServiceAddress& address, const client::Request& request)
       break;
     case Outcome::Error:
       complain("the service answered with an error: " + answer.reply.error.domain + " " +
-               std::to_string(answer.reply.error.code) + " " + answer.reply.error.text);
+               std::to_string(answer.reply.error.code) + " " + answer.reply.error.text + hintOf(answer.reply.error));
       answer.status = kFailure;
       break;
     case Outcome::TimedOut:

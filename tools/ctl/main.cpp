@@ -77,6 +77,14 @@ int mainProgram(int argc, const char* const* argv) {
   if (!options.socket.empty()) {
     context.socket.sockets = {options.socket};
   }
+  if (context.socket.sockets.size() == 1) {
+    context.ordinarySocket = context.socket.sockets.front();
+  }
+  if (options.admin) {
+    for (std::string& socket : context.socket.sockets) {
+      socket = linux_host::adminSocketPath(socket);
+    }
+  }
   context.socket.timeout = milliseconds(options.timeout);
   context.terminal = terminalOf(currentTerminal(), colorChoice(options.color), options.quiet);
   if (options.wait) {

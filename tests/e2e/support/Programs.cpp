@@ -67,11 +67,15 @@ void writeNumber(pid_t number, char* at) {
   ::dup2(complaints, STDERR_FILENO);
   if (setup.listenFd >= 0) {
     constexpr int kFirstHandedOver = 3;
+    const int admin = setup.adminListenFd < 0 ? -1 : ::fcntl(setup.adminListenFd, F_DUPFD, kFirstHandedOver + 2);
     ::dup2(setup.listenFd, kFirstHandedOver);
     ::fcntl(kFirstHandedOver, F_SETFD, 0);  // it may have been that number already
+    if (admin >= 0) {
+      ::dup2(admin, kFirstHandedOver + 1);
+    }
     writeNumber(::getpid(), listenPid);
   }
-  ::close_range(setup.listenFd >= 0 ? 4 : 3, ~0U, 0);
+  ::close_range(3U + (setup.listenFd >= 0 ? 1U : 0U) + (setup.adminListenFd >= 0 ? 1U : 0U), ~0U, 0);
   ::execve(words[0], words.data(), environment.data());
   ::_exit(127);
 }
@@ -109,7 +113,11 @@ Process::Process(const Setup& setup, const TemporaryDirectory& directory) {
   constexpr std::string_view kListenPid = "LISTEN_PID=0000000000";
   std::size_t listenPid = 0;
   if (setup.listenFd >= 0) {
-    variables.emplace_back("LISTEN_FDS=1");
+    const bool isPair = setup.adminListenFd >= 0;
+    variables.emplace_back(isPair ? "LISTEN_FDS=2" : "LISTEN_FDS=1");
+    if (isPair) {
+      variables.emplace_back("LISTEN_FDNAMES=socket:admin");
+    }
     listenPid = variables.size();
     variables.emplace_back(kListenPid);
   }

@@ -51,6 +51,7 @@ class Process {
     int inputFd = -1;                      // what it reads instead of `input`
     int outputFd = -1;                     // where stdout goes instead of a file
     int listenFd = -1;                     // handed over as a service manager does
+    int adminListenFd = -1;                // with that one, by the name "admin"
     std::vector<std::string> environment;  // NAME=VALUE, besides the test's own
   };
   Process(const Setup& setup, const TemporaryDirectory& directory);

@@ -70,6 +70,45 @@ TEST_F(CheckTest, AGoodInstallationIsGoodInEachLineAndNothingIsMade) {
   EXPECT_EQ(files(), before);
 }
 
+TEST_F(CheckTest, AdminSocketHasALineWhereTheConfigurationWantsOne) {
+  folder_.write("c.toml", "[access]\nadmin = \"separate\"\n");
+  subject_.options.configurationFile = folder_.path("c.toml");
+  const std::vector<Check> checks = checkAll(subject_);
+  ASSERT_EQ(checks.size(), 10u);
+  EXPECT_EQ(lineOf(checks[8]),
+            "good admin-socket: " + folder_.path("socket-admin") + " isn't there, the service makes it");
+}
+
+TEST_F(CheckTest, AdminSocketIsTheNamedOneElseTheOneBesideTheSocket) {
+  expectGood(checkAdminSocket(subject_), folder_.path("socket-admin") + " isn't there");
+  folder_.write("socket-admin", "");
+  expectBad(checkAdminSocket(subject_), "remove it, or name another with --admin-socket");
+  subject_.options.adminSocketPath = folder_.path("named");
+  expectGood(checkAdminSocket(subject_), folder_.path("named") + " isn't there");
+  subject_.options.adminSocketPath.reset();
+  subject_.options.socketPath.reset();
+  expectBad(checkAdminSocket(subject_), "name one with --admin-socket");
+  subject_.isHandedOver = true;
+  expectGood(checkAdminSocket(subject_), "handed over by the service manager");
+}
+
+TEST_F(CheckTest, AdminSocketIsTheManagersWhereTheOrdinaryOneIs) {
+  const auto listenAt = [](const std::string& path) {
+    UniqueDescriptor socket(::socket(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0));
+    sockaddr_un address{};
+    address.sun_family = AF_UNIX;
+    std::memcpy(address.sun_path, path.data(), path.size());
+    EXPECT_EQ(::bind(socket.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
+    EXPECT_EQ(::listen(socket.get(), 1), 0);
+    return socket;
+  };
+  subject_.unitFolders = {folder_.path("units")};
+  const UniqueDescriptor ordinary = listenAt(folder_.path("socket"));
+  expectBad(checkAdminSocket(subject_), "systemctl enable --now tarnreportingd-admin.socket");
+  const UniqueDescriptor admin = listenAt(folder_.path("socket-admin"));
+  expectGood(checkAdminSocket(subject_), folder_.path("socket-admin") + " is the service manager's");
+}
+
 TEST_F(CheckTest, ALineIsOneLineWhateverItNames) {
   EXPECT_EQ(lineOf(good("store", "a\nb")), "good store: a\\u000ab");
   EXPECT_EQ(lineOf(bad("store", "x")), "bad store: x");
