@@ -40,8 +40,8 @@ if(TARN_HARDENING AND NOT (TARN_SANITIZE OR TARN_COVERAGE OR TARN_FUZZ))
 endif()
 # By which a program, its debug symbols and a crash's memory are matched; the same for the same code.
 add_link_options(-Wl,--build-id=sha1)
-# Nobody's folders in what is built: it is the same wherever the source lies. As seen from the build's folder, so that it
-# is also the same with a compiler's cache, which asks for files by such names.
+# Nobody's folders in what is built: it is the same wherever the source lies. As seen from the build's folder, so that
+# it is also the same with a compiler's cache, which asks for files by such names.
 add_compile_options("-ffile-prefix-map=${PROJECT_SOURCE_DIR}=..")
 # Programs find the tree's libraries from where they stand themselves. An installation takes that out again, but the
 # table keeps the place, whose size would be that of a folder's name.

@@ -260,15 +260,35 @@ class FreshMachine(unittest.TestCase):
         self.does("systemctl", "restart", SERVICE)
         self.assertEqual(self.state(SERVICE), "active")
 
-    def test_09_restarts_lose_nothing(self):
+    def test_09_only_the_admin_socket_ends_it_where_that_is_wanted(self):
+        setting = "/etc/tarnreporting/tarnreportingd.toml.d/60-access.toml"
+        self.does("sh", "-c", f"printf '[access]\\nadmin = \"separate\"\\n' > {setting}")
+        self.does("systemctl", "restart", SERVICE)
+        before = self.state(SERVICE, "MainPID")
+        as_member = ("runuser", "-u", "member", "--", "tarnreportingctl")
+        refused = self.machine.run(*as_member, "kill")
+        self.assertEqual(refused.returncode, 1)
+        self.assertIn("6 only over the admin socket (give --admin)", refused.stdout + refused.stderr)
+        self.assertEqual(self.machine.run(*as_member, "--admin", "status").returncode, 69)
+        self.assertEqual(self.state(SERVICE, "MainPID"), before)
+        self.assertIn("good", self.does("tarnreportingctl", "check"))
+        self.does("tarnreportingctl", "--admin", "kill")
+        self.status()
+        self.assertNotIn(self.state(SERVICE, "MainPID"), (before, "0"))
+        self.does("rm", setting)
+        self.does("systemctl", "restart", SERVICE)
+        self.does(*as_member, "kill")
+        self.status()
+
+    def test_10_restarts_lose_nothing(self):
         self.ends(options.restarts, "restart")
 
-    def test_10_kills_are_made_good_each_time_and_lose_what_was_not_committed_at_most(self):
+    def test_11_kills_are_made_good_each_time_and_lose_what_was_not_committed_at_most(self):
         lost = self.ends(options.kills, "kill")
         # 200 ms of what is reported a second, at each.
         self.assertLessEqual(lost, options.kills * RATE * 0.2)
 
-    def test_11_the_watchdog_ends_a_service_that_hangs(self):
+    def test_12_the_watchdog_ends_a_service_that_hangs(self):
         self.status()
         before = self.state(SERVICE, "MainPID")
 
@@ -283,10 +303,10 @@ class FreshMachine(unittest.TestCase):
         self.assertLess(seconds, 60)
         self.assertIn("sys.oxbow.tarnkit.Playback.Start", self.events())
 
-    def test_12_a_flood_in_the_journal_holds_nobody(self):
+    def test_13_a_flood_in_the_journal_holds_nobody(self):
         self.reported(lambda: self.does("python3", "-B", "/story/flood.py", "100000"))
 
-    def test_13_a_journal_that_stalls_holds_nobody(self):
+    def test_14_a_journal_that_stalls_holds_nobody(self):
         def stall():
             self.does("systemctl", "kill", "--signal=STOP", "--kill-whom=main", "systemd-journald.service")
             try:
@@ -298,7 +318,7 @@ class FreshMachine(unittest.TestCase):
         print(f"    the slowest answer took {slowest:.0f} ms", flush=True)
         self.assertLess(slowest, 1000)
 
-    def test_14_without_a_journal_it_starts_and_serves(self):
+    def test_15_without_a_journal_it_starts_and_serves(self):
         units = [f"systemd-journald{end}" for end in (".socket", "-dev-log.socket", "-audit.socket", ".service")]
 
         def without():
@@ -314,7 +334,7 @@ class FreshMachine(unittest.TestCase):
         self.does("systemctl", "restart", SERVICE)
         self.assertEqual(self.state(SERVICE), "active")
 
-    def test_15_an_upgrade_keeps_the_socket_and_loses_nothing(self):
+    def test_16_an_upgrade_keeps_the_socket_and_loses_nothing(self):
         if options.before:
             self.install("before", "--allow-downgrades")
             self.does("systemctl", "restart", SERVICE)
@@ -334,7 +354,7 @@ class FreshMachine(unittest.TestCase):
         self.assertNotIn(after, (before, "0"))
         self.assertIn("sys.oxbow.tarnkit.Playback.Start", self.events())
 
-    def test_16_a_purge_leaves_nothing(self):
+    def test_17_a_purge_leaves_nothing(self):
         names = sorted({name_of(path) for path in package_files(options.packages)})
         self.does("apt-get", "purge", "--yes", "--quiet", *names)
         left = sorted(name for name in self.machine.files() - self.files_before if "tarn" in name.lower())

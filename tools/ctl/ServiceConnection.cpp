@@ -30,7 +30,7 @@ bool nobodyListens(std::int64_t errorNumber) {
 }
 
 // What to do about it, for an error whose text doesn't say so.
-std::string hintOf(const client::RemoteError& error) {
+std::string hintOf(const wire::ReplyError& error) {
   const bool isAdminOnly =
       error.domain == wire::kErrorDomain && error.code == static_cast<std::int64_t>(wire::ErrorCode::AdminOnly);
   return isAdminOnly ? " (give --admin)" : "";

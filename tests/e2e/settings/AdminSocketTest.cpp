@@ -126,7 +126,7 @@ TEST_P(AdminSocketOfTwoUsers, AnothersSessionsAreNotSeenButReached) {
   EXPECT_EQ(mine->send(client::startReportingSessionForID(7)), client::SendStatus::Sent);
   EXPECT_EQ(resultOf(*theirs, client::sendMessage({{"a", 1}}, 4, 1, Identifiers{7})), "none");
   EXPECT_EQ(resultOf(*theirs, client::sendMessage({{"a", 1}}, 4, 1, Identifiers{12345})), "none");
-  EXPECT_EQ(eventsOnceThereAre(1, "*.Playback.Start").size(), 1u);
+  EXPECT_EQ(eventsOnceThereAre(1, "sys.oxbow.tarnkit.Playback.Start").size(), 1u);
 
   const auto usersSeen = [](client::ClientConnection& client) {
     const client::Reply reply = client.call(client::status(), kDeadline);
