@@ -2,10 +2,12 @@
 #include "host/check/Check.h"
 
 #include <systemd/sd-daemon.h>
+#include <systemd/sd-path.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cstdlib>
+#include <memory>
 
 #include "host/check/SettingsChecks.h"
 #include "host/check/SocketChecks.h"
@@ -15,16 +17,33 @@
 
 namespace tarn::linux_host {
 
+namespace {
+
+// Where the service manager that this user has looks for units, in its order.
+std::vector<std::string> unitFolders() {
+  char** found = nullptr;
+  const bool isRoot = ::geteuid() == 0;
+  if (sd_path_lookup_strv(isRoot ? SD_PATH_SYSTEMD_SEARCH_SYSTEM_UNIT : SD_PATH_SYSTEMD_SEARCH_USER_UNIT, nullptr,
+                          &found) < 0) {
+    return {};
+  }
+  const std::unique_ptr<char*, decltype(&std::free)> list(found, &std::free);
+  std::vector<std::string> folders;
+  for (char** folder = found; *folder != nullptr; ++folder) {
+    const std::unique_ptr<char, decltype(&std::free)> name(*folder, &std::free);
+    folders.emplace_back(name.get());
+  }
+  return folders;
+}
+
+}  // namespace
+
 CheckSubject subjectOf(ServiceOptions options) {
   CheckSubject subject;
   subject.options = std::move(options);
   subject.isHandedOver = sd_listen_fds(0) > 0;
   if (sd_booted() > 0) {
-    const std::string kind = ::geteuid() == 0 ? "system" : "user";
-    for (const char* const folder :
-         {"/etc/systemd/", "/run/systemd/", "/usr/local/lib/systemd/", "/usr/lib/systemd/"}) {
-      subject.unitFolders.push_back(folder + kind);
-    }
+    subject.unitFolders = unitFolders();
   }
   return subject;
 }
