@@ -10,7 +10,8 @@ from dataclasses import dataclass
 
 from tree import Finding, code_only, matches
 
-HOST = ("host/*", "recorder/*", "service/main.cpp", "tools/*", "client/*", "clients/*", "adapters/*")
+HOST = ("host/*", "recorder/*", "service/main.cpp", "tools/*", "client/*", "clients/*", "adapters/*",
+        "fleet/*")
 TRIALS = ("tests/*", "bench/*", "fuzz/*")
 # Where time is the real one: real programs, the real machine's folders, and two adapters that have nothing to wait on.
 REAL_TIME = ("tests/adapters/*", "tests/e2e/*", "tests/scenario/*", "tests/host/*", "tests/recorder/*",
@@ -63,10 +64,11 @@ BANS = (
     Ban(r"\bstd::random_device\b", HOST + TRIALS, "platform::RandomSource"),
     Ban(call("strerror|strerror_r|perror"), NOWHERE, "std::generic_category().message(code)"),
     Ban(r"\bstd::endl\b", NOWHERE, "'\\n'"),
-    Ban(r"\bstd::(?:cout|cerr|clog|cin)\b", ("service/main.cpp", "tools/*", *TRIALS, "host/*"),
+    Ban(r"\bstd::(?:cout|cerr|clog|cin)\b", ("service/main.cpp", "tools/*", *TRIALS, "host/*", "fleet/export/main.cpp"),
         "the logging helper"),
     Ban(call("printf|fprintf|vprintf|vfprintf|puts|fputs|putchar"),
-        ("service/main.cpp", "tools/*", *TRIALS, "host/*", "adapters/*", *LAST_WORDS), "the logging helper"),
+        ("service/main.cpp", "tools/*", *TRIALS, "host/*", "adapters/*", "fleet/*",
+                                                                   *LAST_WORDS), "the logging helper"),
     Ban(call("sprintf|vsprintf|asprintf|vasprintf"), NOWHERE, "std::to_chars and append, or std::snprintf"),
     Ban(call("strcpy|strcat|strncpy|strtok|gets"), NOWHERE, "std::string, std::string_view"),
     Ban(call("atoi|atol|atoll|atof|strtol|strtoll|strtoul|strtoull|strtod|strtof|sscanf"), NOWHERE, "std::from_chars"),

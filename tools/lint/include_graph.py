@@ -78,10 +78,17 @@ ROOMS = {
     "tools/mutate": (),
     "tools/report": VALUES + ("host/system",) + STORE,
     "tools/ctl/terminal": PROGRAM,
+    # What carries records of many devices to one place.
+    "fleet/program": VALUES + ("host/system", "host/settings"),
+    "fleet/format": VALUES,
+    "fleet/privacy": VALUES + ("recorder/store",),
+    "fleet/store": VALUES + STORE,
+    "fleet/export": VALUES + STORE + ("fleet/format", "fleet/privacy", "fleet/program", "fleet/store", "host/system",
+                                      "tools/ctl/terminal", "wire"),
     "tools/ctl": PROGRAM + ("client", "dictionary", "tools/script", "tools/ctl/terminal"),
     "tools/ctl/sessions": PROGRAM + ("tools/ctl", "tools/ctl/terminal", "tools/report", "tools/script"),
     "tools/ctl/views": PROGRAM + ("client", "tools/ctl", "tools/ctl/terminal", "tools/report"),
-    "tools/manual": PROGRAM + ("tools/ctl", "adapters/pipewire"),
+    "tools/manual": PROGRAM + ("tools/ctl", "adapters/pipewire", "fleet/export"),
     # What checks the service shares no code with it, but for the client and the reader of the recorder's file.
     "tests/scenario": VALUES + ("client", "wire", "recorder/store/rows", "recorder/store", "recorder/store/reading"),
 }

@@ -11,9 +11,9 @@ import re
 from tree import Finding, code_only
 
 HOME = "service/vocabulary/ProcessState.cpp"
-PRODUCT = ("adapters/", "client/", "clients/", "derived/", "diagnostics/", "dictionary/", "host/", "platform/",
-           "plist/", "recorder/", "service/", "session/", "telemetry/", "testing/", "tools/ctl/", "tools/manual/",
-           "tools/report/", "tools/script/", "wire/")
+PRODUCT = ("adapters/", "client/", "clients/", "derived/", "diagnostics/", "dictionary/", "fleet/", "host/",
+           "platform/", "plist/", "recorder/", "service/", "session/", "telemetry/", "testing/", "tools/ctl/",
+           "tools/manual/", "tools/report/", "tools/script/", "wire/")
 # (file, variable): why it can't live in the home.
 EXCEPTIONS = {
     ("plist/Key.cpp", "instance"): "one copy of each text that never changes; keys are made before main",

@@ -8,6 +8,7 @@
 #include <string>
 
 #include "adapters/pipewire/AdapterOptions.h"
+#include "fleet/export/ExportOptions.h"
 #include "host/settings/ServiceOptions.h"
 #include "tools/ctl/Command.h"
 #include "tools/ctl/CommandLine.h"
@@ -83,6 +84,13 @@ Json adapterJson(streams::Adapter adapter) {
   return commandJson(app);
 }
 
+Json exportJson() {
+  CLI::App app;
+  fleet::ExportOptionTexts texts;
+  fleet::describeExportCommand(app, texts);
+  return commandJson(app);
+}
+
 Json toolJson() {
   CLI::App app;
   ctl::Context context;
@@ -96,8 +104,8 @@ Json toolJson() {
 
 int main() {
   using tarn::streams::Adapter;
-  const auto programs = tarn::Json::array(
-      {tarn::serviceJson(), tarn::toolJson(), tarn::adapterJson(Adapter::Alsa), tarn::adapterJson(Adapter::PipeWire)});
+  const auto programs = tarn::Json::array({tarn::serviceJson(), tarn::toolJson(), tarn::adapterJson(Adapter::Alsa),
+                                           tarn::adapterJson(Adapter::PipeWire), tarn::exportJson()});
   std::cout << programs.dump(1) << '\n';
   return std::cout.good() ? 0 : 1;
 }
