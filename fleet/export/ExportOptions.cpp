@@ -65,7 +65,7 @@ Settings settingsOf(ExportConfiguration& configuration) {
           {"privacy", "sample", takeNumber(rules.sample, 0, 1)},
           {"privacy", "rotate_days", takeWhole(rules.rotateDays, 0, 36500)},
           {"privacy", "key_file", takeText(configuration.keyFile)},
-          {"server", "urls", takeText(server.urls)},
+          {"server", "urls", takeServers(server.urls)},
           {"server", "subject", takeText(server.subject)},
           {"server", "credentials_file", takeText(server.credentialsFile)},
           {"server", "authority_file", takeText(server.authorityFile)},

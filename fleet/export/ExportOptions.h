@@ -7,6 +7,7 @@
 
 #include "fleet/privacy/Rules.h"
 #include "fleet/program/ProgramLog.h"
+#include "fleet/publish/ServerSettings.h"
 #include "plist/Result.h"
 
 namespace CLI {
@@ -46,14 +47,6 @@ struct ExportCommand {
   Status usage;        // wrong: one line that names the option
 };
 ExportCommand parseExportCommand(int argumentCount, const char* const* arguments);
-
-// How a program of the fleet comes to its servers.
-struct ServerSettings {
-  std::string urls = "nats://127.0.0.1:4222";  // several with commas
-  std::string subject = "tarnreporting";       // messages of a device have this and the device's name
-  std::string credentialsFile;
-  std::string authorityFile, certificateFile, keyFile;  // of TLS
-};
 
 struct ExportConfiguration {
   Rules rules;

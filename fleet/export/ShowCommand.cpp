@@ -120,16 +120,16 @@ struct Total {
   std::optional<double> first;
 };
 
-Status showBatch(const v1::Batch& batch, MessagePacker& packer, Total& total, std::ostream& out) {
-  Result<std::string> message = packer.pack(batch);
+Status showBatch(v1::Batch& batch, MessagePacker& packer, Total& total, std::ostream& out) {
+  const Result<PackedMessage> message = packer.pack(batch);
   if (message.failed()) return message.error;
-  const auto unpacked = unpackMessage(message.value);
+  const auto unpacked = unpackMessage(message.value.bytes);
   if (unpacked.failed()) return unpacked.error;
   std::string text;
   appendBatch(text, *unpacked.value);
   out << text;
   total.events += unpacked.value->events_size();
-  total.bytes += static_cast<std::int64_t>(message.value.size());
+  total.bytes += static_cast<std::int64_t>(message.value.bytes.size());
   ++total.messages;
   return {};
 }
@@ -198,9 +198,9 @@ Status showStore(StoreTail& store, PrivacySieve& sieve, const std::string& devic
     if (page.failed()) return page.error;
     if (page.value.missing || page.value.rows.empty()) break;
     if (Status looked = store.look(); looked.failed()) return looked;
-    const auto made = maker.make(page.value.rows, after, static_cast<std::int64_t>(now * kMicroseconds), store);
+    auto made = maker.make(page.value.rows, after, static_cast<std::int64_t>(now * kMicroseconds), store);
     if (made.failed()) return made.error;
-    const v1::Batch& batch = made.value.batch;
+    v1::Batch& batch = made.value.batch;
     if (Status shown = showBatch(batch, packer, total, out); shown.failed()) return shown;
     total.first = total.first.value_or(page.value.rows.front().time);
     isMore = page.value.more || batch.last() < page.value.rows.back().id;

@@ -7,6 +7,7 @@
 #include <utility>
 
 #include "fleet/export/ExportOptions.h"
+#include "fleet/export/ExportProgram.h"
 #include "fleet/export/ShowCommand.h"
 #include "host/system/SmallFile.h"
 #include "host/system/SystemError.h"
@@ -69,7 +70,11 @@ int run(const ExportOptions& options) {
   if (options.show) return show(options, configuration.value);
   // Before anything else is done: no socket, no file.
   if (configuration.value.rules.mode == Mode::Off) return 0;
-  return refuse({0, "this build can't send yet"}, kExitFailure);
+  const Result<FleetKey> key = readKey(configuration.value.keyFile);
+  if (key.failed()) return refuse(*key.error, kExitConfiguration);
+  const Result<std::string> device = readDevice(key.value, options.machineId);
+  if (device.failed()) return refuse(*device.error, kExitFailure);
+  return runExport(options, configuration.value, key.value, device.value);
 }
 
 }  // namespace

@@ -26,6 +26,17 @@ std::string withoutWord(std::int64_t id) {
   return "nothing tells of the id " + std::to_string(id);
 }
 
+std::string messageIdOf(const v1::Batch& batch, std::string_view plain) {
+  std::array<unsigned char, kHashBytes> hash{};
+  crypto_generichash(hash.data(), hash.size(), reinterpret_cast<const unsigned char*>(plain.data()), plain.size(),
+                     nullptr, 0);
+  std::string id;
+  plist::appendHex(id, std::string_view(batch.device()));
+  id += '.' + std::to_string(batch.first()) + '-' + std::to_string(batch.last()) + '.';
+  plist::appendHex(id, std::string_view(reinterpret_cast<const char*>(hash.data()), hash.size()));
+  return id;
+}
+
 // Goes through events and gaps, both rising, and counts what neither has.
 std::string coverFault(const v1::Batch& batch) {
   std::int64_t absent = 0;
@@ -61,17 +72,24 @@ MessagePacker::~MessagePacker() {
   ZSTD_freeCCtx(context_);
 }
 
-Result<std::string> MessagePacker::pack(const v1::Batch& batch) {
+Result<PackedMessage> MessagePacker::pack(v1::Batch& batch) {
+  v1::Batch look;
+  look.set_looked_at(batch.looked_at());
+  batch.clear_looked_at();
   batch.SerializeToString(&plain_);
-  Result<std::string> message;
-  message.value.resize(kMark.size() + ZSTD_compressBound(plain_.size()));
-  message.value.replace(0, kMark.size(), kMark);
-  const std::size_t size =
-      ZSTD_compressCCtx(context_, message.value.data() + kMark.size(), message.value.size() - kMark.size(),
-                        plain_.data(), plain_.size(), kCompression);
+  batch.set_looked_at(look.looked_at());
+  Result<PackedMessage> packed;
+  packed.value.id = messageIdOf(batch, plain_);
+  // A field may stand anywhere.
+  look.AppendToString(&plain_);
+  std::string& message = packed.value.bytes;
+  message.resize(kMark.size() + ZSTD_compressBound(plain_.size()));
+  message.replace(0, kMark.size(), kMark);
+  const std::size_t size = ZSTD_compressCCtx(context_, message.data() + kMark.size(), message.size() - kMark.size(),
+                                             plain_.data(), plain_.size(), kCompression);
   if (ZSTD_isError(size) != 0) return {{}, Error{0, std::string("zstd: ") + ZSTD_getErrorName(size)}};
-  message.value.resize(kMark.size() + size);
-  return message;
+  message.resize(kMark.size() + size);
+  return packed;
 }
 
 std::string batchFault(const v1::Batch& batch) {
@@ -109,17 +127,6 @@ Result<std::unique_ptr<v1::Batch>> unpackMessage(std::string_view message) {
   if (!batch->ParseFromString(plain)) return {{}, Error{0, "it can't be parsed"}};
   if (std::string fault = batchFault(*batch); !fault.empty()) return {{}, Error{0, std::move(fault)}};
   return {std::move(batch), {}};
-}
-
-std::string messageIdOf(const v1::Batch& batch, std::string_view message) {
-  std::array<unsigned char, kHashBytes> hash{};
-  crypto_generichash(hash.data(), hash.size(), reinterpret_cast<const unsigned char*>(message.data()), message.size(),
-                     nullptr, 0);
-  std::string id;
-  plist::appendHex(id, std::string_view(batch.device()));
-  id += '.' + std::to_string(batch.first()) + '-' + std::to_string(batch.last()) + '.';
-  plist::appendHex(id, std::string_view(reinterpret_cast<const char*>(hash.data()), hash.size()));
-  return id;
 }
 
 }  // namespace tarn::fleet

@@ -28,6 +28,13 @@ inline constexpr std::size_t kMostBatchBytes = 900'000;
 // Of its records, and of each of the lists in it.
 inline constexpr int kMostRecords = 4096;
 
+// A message, and which one it is: device, ids and a hash of what is in it but the time of the look. So it is the same
+// whenever it is made again of the same records, and a server that knows messages by this drops one that comes twice.
+struct PackedMessage {
+  std::string id;
+  std::string bytes;
+};
+
 class MessagePacker {
  public:
   MessagePacker();
@@ -36,7 +43,8 @@ class MessagePacker {
   MessagePacker& operator=(const MessagePacker&) = delete;
 
   // The message of a batch that batchFault() has nothing against. The error is want of memory.
-  Result<std::string> pack(const v1::Batch& batch);
+  // The batch is as before when it returns.
+  Result<PackedMessage> pack(v1::Batch& batch);
 
  private:
   ZSTD_CCtx_s* context_;
@@ -48,9 +56,5 @@ class MessagePacker {
 std::string batchFault(const v1::Batch& batch);
 // The batch of a message. The error says what is wrong with the bytes.
 Result<std::unique_ptr<v1::Batch>> unpackMessage(std::string_view message);
-
-// Which message it is, whenever and by whomever it is made again: device, ids and what is in it. A server that knows
-// messages by this drops one that comes twice.
-std::string messageIdOf(const v1::Batch& batch, std::string_view message);
 
 }  // namespace tarn::fleet

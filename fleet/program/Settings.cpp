@@ -1,7 +1,10 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "fleet/program/Settings.h"
 
+#include <algorithm>
+#include <charconv>
 #include <cmath>
+#include <iterator>
 #include <utility>
 
 #include "host/settings/TomlParser.h"
@@ -97,11 +100,48 @@ class Reader {
   std::string text_;
 };
 
+// What stands before the last '@' is a user or a token, and anything.
+bool isServer(std::string_view address) {
+  constexpr std::string_view kSchemes[] = {"nats://", "tls://"};
+  const auto* const scheme = std::find_if(std::begin(kSchemes), std::end(kSchemes),
+                                          [&](std::string_view each) { return address.starts_with(each); });
+  if (scheme == std::end(kSchemes)) return false;
+  std::string_view host = address.substr(scheme->size());
+  host.remove_prefix(host.rfind('@') == std::string_view::npos ? 0 : host.rfind('@') + 1);
+  const bool isInBrackets = host.starts_with('[');
+  const std::size_t hostEnd = std::min(isInBrackets ? host.find(']') : host.find(':'), host.size());
+  const std::string_view name = host.substr(isInBrackets ? 1 : 0, hostEnd - (isInBrackets ? 1 : 0));
+  const std::string_view allowed =
+      isInBrackets ? "0123456789abcdefABCDEF:." : "0123456789abcdefghijklmnopqrstuvwxyzABCDEFGHIJKLMNOPQRSTUVWXYZ-._";
+  if (name.empty() || name.find_first_not_of(allowed) != std::string_view::npos) return false;
+  if (isInBrackets && hostEnd == host.size()) return false;
+  const std::string_view port = host.substr(std::min(hostEnd + (isInBrackets ? 1 : 0), host.size()));
+  if (port.empty()) return true;
+  int number = 0;
+  const auto [end, error] = std::from_chars(port.data() + 1, port.data() + port.size(), number);
+  return port.front() == ':' && error == std::errc() && end == port.data() + port.size() && number > 0 &&
+         number <= 65535;
+}
+
 }  // namespace
 
 std::function<std::string(const SettingValue&)> takeText(std::string& into) {
   return [&into](const SettingValue& value) -> std::string {
     if (value.kind != SettingValue::Kind::Text || value.text.empty()) return "must be a text that isn't empty";
+    into = value.text;
+    return {};
+  };
+}
+
+std::function<std::string(const SettingValue&)> takeServers(std::string& into) {
+  return [&into](const SettingValue& value) -> std::string {
+    bool isRight = value.kind == SettingValue::Kind::Text && !value.text.empty();
+    for (std::size_t begin = 0; isRight && begin <= value.text.size();) {
+      const std::size_t end = std::min(value.text.find(',', begin), value.text.size());
+      isRight = isServer(std::string_view(value.text).substr(begin, end - begin));
+      begin = end + 1;
+    }
+    if (!isRight) return "must be addresses like nats://host:4222 or tls://host:4222, with commas between them";
     into = value.text;
     return {};
   };

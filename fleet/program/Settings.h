@@ -36,6 +36,8 @@ struct Setting {
 using Settings = std::vector<Setting>;
 
 std::function<std::string(const SettingValue&)> takeText(std::string& into);
+// Addresses of servers, several with commas: nats://host:4222, tls://name:4222, also with a user before the host.
+std::function<std::string(const SettingValue&)> takeServers(std::string& into);
 std::function<std::string(const SettingValue&)> takeTexts(std::vector<std::string>& into);
 // Between the two, both included.
 std::function<std::string(const SettingValue&)> takeNumber(double& into, double least, double most);

@@ -41,6 +41,22 @@ TEST(ExportOptions, TheConfigurationSaysWhatLeaves) {
   EXPECT_EQ(read.value.server.urls, "tls://one:4222,tls://two:4222");
 }
 
+constexpr const char* kNoServers =
+    "f:2: \"server.urls\" must be addresses like nats://host:4222 or tls://host:4222, with commas between them";
+
+TEST(ExportOptions, ServersAreAddresses) {
+  for (const char* const right :
+       {"nats://a", "nats://user:p@ss@a.b-c:1", "tls://[::1]:65535", "nats://a,tls://b:4222"}) {
+    EXPECT_TRUE(parseExportConfiguration("[server]\nurls = '" + std::string(right) + "'", "f").ok()) << right;
+  }
+  for (const char* const wrong :
+       {"a:4222", "http://a", "nats://", "nats://[", "nats://[]", "nats://[::1", "nats://[::1]x", "nats://a b",
+        "nats://a:", "nats://a:0", "nats://a:65536", "nats://a:1x", "nats://a,", ",nats://a", "nats://user@"}) {
+    EXPECT_EQ(parseExportConfiguration("[server]\nurls = '" + std::string(wrong) + "'", "f").error.text(), kNoServers)
+        << wrong;
+  }
+}
+
 TEST(ExportOptions, AWrongConfigurationIsRefusedByLineAndName) {
   const auto fault = [](std::string_view text) { return parseExportConfiguration(text, "f").error.text(); };
   EXPECT_EQ(fault("[privacy]\nmode = 'on'"), "f:2: \"privacy.mode\" must be \"off\", \"local\" or \"export\"");
@@ -50,7 +66,8 @@ TEST(ExportOptions, AWrongConfigurationIsRefusedByLineAndName) {
             "f:2: \"privacy.rotate_days\" must be a whole number from 0 to 36500");
   EXPECT_EQ(fault("[privacy]\nkeys = ['']"), "f:2: \"privacy.keys\" must be a list of texts, none of them empty");
   EXPECT_EQ(fault("[privacy]\nkeys = 'a'"), "f:2: \"privacy.keys\" must be a list of texts, none of them empty");
-  EXPECT_EQ(fault("[server]\nurls = 4222"), "f:2: \"server.urls\" must be a text that isn't empty");
+  EXPECT_EQ(fault("[server]\nurls = 4222"), kNoServers);
+  EXPECT_EQ(fault("[server]\nurls = ''"), kNoServers);
   EXPECT_EQ(fault("[privacy]\n\nkey = 'a'"), "f:3: unknown key \"privacy.key\"");
   EXPECT_EQ(fault("[other]\n"), "f:1: unknown section \"other\"");
   EXPECT_EQ(fault("mode = 'off'"), "f:1: unknown key \"mode\"");

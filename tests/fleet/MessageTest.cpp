@@ -15,11 +15,15 @@ namespace {
 
 using testing::someBatch;
 
-std::string packed(const v1::Batch& batch) {
+PackedMessage packedWithId(v1::Batch batch) {
   MessagePacker packer;
-  Result<std::string> message = packer.pack(batch);
+  Result<PackedMessage> message = packer.pack(batch);
   EXPECT_TRUE(message.ok()) << message.error.text();
   return message.value;
+}
+
+std::string packed(const v1::Batch& batch) {
+  return packedWithId(batch).bytes;
 }
 
 TEST(FleetMessage, WhatIsPackedIsUnpackedAgain) {
@@ -119,13 +123,15 @@ TEST(FleetMessage, ARangeMayBeEmptyAndNotLessThanThat) {
   EXPECT_EQ(batchFault(batch), "its device isn't one");
 }
 
-TEST(FleetMessage, TheSameBatchHasTheSameIdAndAnotherHasAnother) {
+TEST(FleetMessage, TheSameRecordsHaveTheSameIdWheneverTheyAreLookedAtAndOthersHaveAnother) {
   v1::Batch batch = someBatch();
-  const std::string id = messageIdOf(batch, packed(batch));
-  EXPECT_EQ(id, messageIdOf(batch, packed(batch)));
-  EXPECT_EQ(id.substr(0, 39), "64646464646464646464646464646464.11-21.");
+  const PackedMessage message = packedWithId(batch);
+  EXPECT_EQ(message.id.substr(0, 39), "64646464646464646464646464646464.11-21.");
+  batch.set_looked_at(batch.looked_at() + 1);
+  EXPECT_EQ(packedWithId(batch).id, message.id);
+  EXPECT_NE(packedWithId(batch).bytes, message.bytes);
   batch.mutable_events(0)->set_payload("{}");
-  EXPECT_NE(id, messageIdOf(batch, packed(batch)));
+  EXPECT_NE(packedWithId(batch).id, message.id);
 }
 
 }  // namespace

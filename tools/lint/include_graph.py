@@ -83,8 +83,11 @@ ROOMS = {
     "fleet/format": VALUES,
     "fleet/privacy": VALUES + ("recorder/store",),
     "fleet/store": VALUES + STORE,
-    "fleet/export": VALUES + STORE + ("fleet/format", "fleet/privacy", "fleet/program", "fleet/store", "host/system",
-                                      "tools/ctl/terminal", "wire"),
+    "fleet/cursor": VALUES + STORE + ("fleet/store", "host/system"),
+    "fleet/publish": VALUES + ("fleet/cursor", "host/system"),
+    "fleet/export": VALUES + STORE + (
+        "fleet/cursor", "fleet/publish", "fleet/format", "fleet/privacy", "fleet/program", "fleet/store",
+        "host/system", "tools/ctl/terminal", "wire"),
     "tools/ctl": PROGRAM + ("client", "dictionary", "tools/script", "tools/ctl/terminal"),
     "tools/ctl/sessions": PROGRAM + ("tools/ctl", "tools/ctl/terminal", "tools/report", "tools/script"),
     "tools/ctl/views": PROGRAM + ("client", "tools/ctl", "tools/ctl/terminal", "tools/report"),

@@ -1,0 +1,16 @@
+// SPDX-License-Identifier: Apache-2.0
+// How a program of the fleet comes to its servers. Plain data.
+#pragma once
+
+#include <string>
+
+namespace tarn::fleet {
+
+struct ServerSettings {
+  std::string urls = "nats://127.0.0.1:4222";  // several with commas
+  std::string subject = "tarnreporting";       // messages of a device have this and the device's name
+  std::string credentialsFile;
+  std::string authorityFile, certificateFile, keyFile;  // of TLS
+};
+
+}  // namespace tarn::fleet

@@ -1,0 +1,246 @@
+// SPDX-License-Identifier: Apache-2.0
+#include "fleet/export/Exporter.h"
+
+#include <gtest/gtest.h>
+
+#include <memory>
+#include <random>
+#include <set>
+
+#include "tests/ctl/SessionStoreFixture.h"
+#include "tests/fleet/FakePublisher.h"
+#include "tests/support/Seeds.h"
+
+namespace tarn::fleet {
+namespace {
+
+using namespace std::chrono_literals;
+using testing::FakePublisher;
+
+// What a collector would have made of what arrived.
+struct Arrived {
+  std::set<std::int64_t> events;
+  std::int64_t repeated = 0;
+  std::set<std::int64_t> leftOutRanges;  // firsts of batches, once each
+  std::set<std::int64_t> gaps;           // ids
+  std::set<std::int64_t> ended;          // sessions
+};
+
+Arrived arrivedAt(const FakePublisher& publisher) {
+  Arrived all;
+  for (const auto& [id, bytes] : publisher.messages()) {
+    const auto batch = unpackMessage(bytes);
+    EXPECT_TRUE(batch.ok()) << batch.error.text();
+    if (batch.failed()) continue;
+    for (const v1::Event& event : batch.value->events()) {
+      all.repeated += all.events.insert(batch.value->first() + event.ahead()).second ? 0 : 1;
+    }
+    for (const v1::Gap& gap : batch.value->gaps()) {
+      for (std::int64_t gone = gap.first(); gone <= gap.last(); ++gone) {
+        all.gaps.insert(gone);
+      }
+    }
+    for (const v1::Session& session : batch.value->sessions()) {
+      if (session.has_ended()) {
+        all.ended.insert(session.id());
+      }
+    }
+  }
+  return all;
+}
+
+class FleetExporter : public testing::SessionStoreFixture {
+ protected:
+  // One run of the program.
+  struct Run {
+    Run(const std::filesystem::path& directory, const std::filesystem::path& file, Publisher& publisher,
+        std::uint64_t seed)
+        : store(file),
+          sieve(rules(), FleetKey::parse(std::string(64, '7')).value),
+          cursor((directory / "cursor").string()),
+          window(publisher, Backoff(seed), {4, 1 << 20, 10s}),
+          exporter(store, sieve, std::string(kDeviceBytes, 'd'), cursor, window, publisher) {
+      const auto begun = exporter.begin();
+      EXPECT_TRUE(begun.ok()) << begun.error.text();
+      remark = begun.value;
+    }
+    static Rules rules() {
+      Rules all;
+      all.others = {"*"};
+      all.keys = {"*"};
+      return all;
+    }
+
+    StoreTail store;
+    PrivacySieve sieve;
+    CursorFile cursor;
+    SendWindow window;
+    Exporter exporter;
+    std::string remark;
+  };
+
+  void begin(std::uint64_t seed = 1) { run_ = std::make_unique<Run>(directory(), file(), publisher_, seed); }
+  void step() {
+    const Status status = run_->exporter.step({1795200000 + std::chrono::duration<double>(now_).count(), now_}, 0ms);
+    EXPECT_TRUE(status.ok()) << status.text();
+    now_ = std::max(now_ + 1ms, run_->window.due().value_or(now_));
+  }
+  void runToTheEnd() {
+    for (int i = 0; i < 100000 && (i == 0 || !run_->exporter.isAtTheEnd()); ++i) {
+      step();
+    }
+    EXPECT_TRUE(run_->exporter.isAtTheEnd());
+  }
+  void addEvents(std::int64_t count, std::int64_t session = 1) {
+    sql("BEGIN");
+    for (std::int64_t i = 0; i < count; ++i) {
+      addEvent(session, 1795158000, "tally", "sys.oxbow.tarnkit.Volume.Summary", R"({"a":1})");
+    }
+    sql("COMMIT");
+  }
+
+  FakePublisher publisher_;
+  std::unique_ptr<Run> run_;
+  std::chrono::nanoseconds now_ = 1000s;
+};
+
+TEST_F(FleetExporter, WithoutAStoreItWaitsForOne) {
+  begin();
+  step();
+  EXPECT_TRUE(run_->exporter.isAtTheEnd());
+  makeStore();
+  addSession({});
+  addEvents(10);
+  runToTheEnd();
+  EXPECT_EQ(arrivedAt(publisher_).events.size(), 10U);
+}
+
+TEST_F(FleetExporter, GoesOnWhereItWasAfterARestart) {
+  makeStore();
+  addSession({});
+  addEvents(5000);
+  begin();
+  runToTheEnd();
+  EXPECT_EQ(run_->exporter.arrived(), 5000);
+  addEvents(10);
+  const std::size_t before = publisher_.messages().size();
+  begin();
+  EXPECT_EQ(run_->remark, "");
+  runToTheEnd();
+  EXPECT_EQ(publisher_.messages().size(), before + 1);
+  EXPECT_EQ(arrivedAt(publisher_).events.size(), 5010U);
+  EXPECT_EQ(arrivedAt(publisher_).repeated, 0);
+}
+
+TEST_F(FleetExporter, TheCursorStaysWhileNothingIsAcknowledged) {
+  makeStore();
+  addSession({});
+  addEvents(100);
+  publisher_.losesAnswers = 1;
+  begin();
+  step();
+  step();
+  EXPECT_EQ(run_->exporter.arrived(), 0);
+  begin();
+  publisher_.losesAnswers = 0;
+  runToTheEnd();
+  // The same message, made again: the stream knows it.
+  EXPECT_EQ(publisher_.messages().size(), 1U);
+  EXPECT_GT(publisher_.repeats(), 0);
+  EXPECT_EQ(run_->exporter.arrived(), 100);
+}
+
+TEST_F(FleetExporter, ADamagedCursorSendsAgainWhatIsKnownByItsIdentity) {
+  makeStore();
+  addSession({});
+  addEvents(100);
+  begin();
+  runToTheEnd();
+  std::filesystem::resize_file(directory() / "cursor", 20);
+  begin();
+  EXPECT_NE(run_->remark, "");
+  runToTheEnd();
+  EXPECT_EQ(arrivedAt(publisher_).events.size(), 100U);
+  EXPECT_EQ(publisher_.messages().size(), 1U);
+}
+
+TEST_F(FleetExporter, AnotherStoreInItsPlaceIsReadFromItsBeginning) {
+  makeStore();
+  addSession({});
+  addEvents(100);
+  begin();
+  runToTheEnd();
+  sql("DELETE FROM event_rows WHERE id > 50; UPDATE runs SET boot = 'another'");
+  begin();
+  runToTheEnd();
+  EXPECT_EQ(run_->exporter.arrived(), 50);
+}
+
+TEST_F(FleetExporter, TheEndOfASessionIsToldThoughNothingMoreCameOfIt) {
+  makeStore();
+  addSession({});
+  addEvents(10);
+  begin();
+  runToTheEnd();
+  EXPECT_TRUE(arrivedAt(publisher_).ended.empty());
+  sql("UPDATE sessions SET ended = 1795158100, end_reason = 'destroyed'");
+  begin();  // another run of the program knows of it too
+  now_ += 20s;
+  runToTheEnd();
+  EXPECT_EQ(arrivedAt(publisher_).ended, std::set<std::int64_t>{1});
+  const std::size_t messages = publisher_.messages().size();
+  now_ += 20s;
+  runToTheEnd();
+  EXPECT_EQ(publisher_.messages().size(), messages);
+}
+
+TEST_F(FleetExporter, WhatWentBeforeItLeftIsAGapExactly) {
+  makeStore();
+  addSession({});
+  addEvents(1000);
+  publisher_.setDown(true);
+  begin();
+  step();
+  // The device's cap: the oldest go, also some of those in the window.
+  sql("DELETE FROM event_rows WHERE id <= 700");
+  begin();
+  publisher_.setDown(false);
+  runToTheEnd();
+  const Arrived all = arrivedAt(publisher_);
+  EXPECT_EQ(all.events.size(), 300U);
+  EXPECT_EQ(all.gaps.size(), 700U);
+  EXPECT_EQ(*all.gaps.rbegin(), 700);
+}
+
+TEST_F(FleetExporter, RefusalsLostAnswersReorderingAndKillsLeaveNothingMissingAndNothingThatCannotBeToldApart) {
+  makeStore();
+  addSession({});
+  for (const std::uint64_t seed : testing::testSeeds(5)) {
+    SCOPED_TRACE(testing::seedNote(seed));
+    std::mt19937_64 random(seed);
+    std::filesystem::remove(directory() / "cursor");
+    publisher_ = FakePublisher(seed);
+    publisher_.refuses = 0.3;
+    publisher_.losesAnswers = 0.1;
+    publisher_.reorders = true;
+    begin(seed);
+    for (int i = 0; i < 300; ++i) {
+      if (random() % 3 == 0) {
+        addEvents(static_cast<std::int64_t>(random() % 300));
+      }
+      if (random() % 20 == 0) {
+        publisher_.forgetOutcomes();
+        begin(seed + static_cast<std::uint64_t>(i));  // killed, and started again
+      }
+      step();
+    }
+    runToTheEnd();
+    const Arrived all = arrivedAt(publisher_);
+    EXPECT_EQ(all.events.size(), static_cast<std::size_t>(lastEvent()));
+    EXPECT_EQ(run_->exporter.arrived(), lastEvent());
+    EXPECT_TRUE(all.gaps.empty());
+  }
+}
+
+}  // namespace
+}  // namespace tarn::fleet
