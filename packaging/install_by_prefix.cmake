@@ -22,3 +22,9 @@ file(INSTALL "${TARN_SCRATCH}/user/tarnreportingd.service" "${TARN_PACKAGING}/sy
   "${TARN_PACKAGING}/systemd/user/tarnreportingd-admin.socket"
   DESTINATION "${prefix}/${TARN_USER_UNIT_DIR}")
 file(INSTALL "${TARN_PACKAGING}/tarnreportingd.toml" DESTINATION "${configuration}/tarnreporting")
+if(TARN_EXPORT)
+  configure_file("${TARN_PACKAGING}/systemd/tarnreporting-export.service.in"
+    "${TARN_SCRATCH}/tarnreporting-export.service" @ONLY)
+  file(INSTALL "${TARN_SCRATCH}/tarnreporting-export.service" DESTINATION "${prefix}/${TARN_UNIT_DIR}")
+  file(INSTALL "${TARN_PACKAGING}/export.toml" DESTINATION "${configuration}/tarnreporting")
+endif()

@@ -13,7 +13,6 @@ namespace tarn::fleet {
 namespace {
 
 constexpr const char* kProgram = "tarnreporting-export";
-constexpr const char* kUsualFile = "/etc/tarnreporting/export.toml";
 constexpr const char* kFooter =
     "Nothing leaves unless the configuration says so; --show may be asked for at any time and sends nothing.\n"
     "\n"
@@ -83,8 +82,9 @@ void describeExportCommand(CLI::App& app, ExportOptionTexts& texts) {
   options.ownDirectory = "/var/lib/tarnreporting-export";
   app.name(kProgram);
   app.description("Carries what the reporting service recorded off the device, as far as its configuration allows.");
-  app.add_option("--config", options.configurationFile,
-                 std::string("Configuration file, TOML (default: ") + kUsualFile + ", if there is one)")
+  app.add_option(
+         "--config", options.configurationFile,
+         "Configuration file, TOML (default: export.toml beside the installed one of the service, if there is one)")
       ->type_name("FILE")
       ->check(checkNotEmpty);
   app.add_option("--state-dir", options.stateDirectory, "The service's state directory, which is read")
@@ -144,7 +144,8 @@ Result<ExportConfiguration> parseExportConfiguration(std::string_view text, std:
 Result<ExportConfiguration> readExportConfiguration(const ExportOptions& options) {
   const bool isNamed = !options.configurationFile.empty();
   Result<ExportConfiguration> read;
-  read.error = readSettings(settingsOf(read.value), isNamed ? options.configurationFile : kUsualFile);
+  read.error =
+      readSettings(settingsOf(read.value), isNamed ? options.configurationFile : options.usualConfigurationFile);
   const bool isMissing = read.error.code() == ENOENT || read.error.code() == ENOTDIR;
   return !isNamed && isMissing ? Result<ExportConfiguration>() : std::move(read);
 }

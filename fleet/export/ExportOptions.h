@@ -22,8 +22,9 @@ inline constexpr int kExitConfiguration = 78;  // a wrong configuration file
 
 struct ExportOptions {
   std::string configurationFile;  // empty: the usual one, which need not be there
-  std::string stateDirectory;     // of the service, whose store is read
-  std::string ownDirectory;       // where the cursor lies
+  std::string usualConfigurationFile = "/etc/tarnreporting/export.toml";
+  std::string stateDirectory;  // of the service, whose store is read
+  std::string ownDirectory;    // where the cursor lies
   std::string machineId = "/etc/machine-id";
   bool show = false;
   std::optional<std::string> since;  // as it was given

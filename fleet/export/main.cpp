@@ -9,6 +9,7 @@
 #include "fleet/export/ExportOptions.h"
 #include "fleet/export/ExportProgram.h"
 #include "fleet/export/ShowCommand.h"
+#include "host/settings/HostPaths.h"
 #include "host/system/SmallFile.h"
 #include "host/system/SystemError.h"
 #include "tools/ctl/terminal/TimeOption.h"
@@ -82,12 +83,16 @@ int run(const ExportOptions& options) {
 
 int main(int argumentCount, char** arguments) {
   using namespace tarn::fleet;
-  const ExportCommand command = parseExportCommand(argumentCount, arguments);
+  ExportCommand command = parseExportCommand(argumentCount, arguments);
   if (command.usage.failed()) return refuse(*command.usage, kExitUsage);
   if (!command.options) {
     std::fputs(command.output.c_str(), stdout);
     return 0;
   }
   if (sodium_init() < 0) return refuse({0, "libsodium can't be used here"}, kExitFailure);
+  const std::string usual = besideDefaultConfiguration(tarn::linux_host::HostEnvironment::current(), "export.toml");
+  if (!usual.empty()) {
+    command.options->usualConfigurationFile = usual;
+  }
   return run(*command.options);
 }

@@ -59,9 +59,13 @@ std::string defaultConfigurationFile(const HostEnvironment& environment) {
   return place + "/tarnreporting/tarnreportingd.toml";
 }
 
-std::string defaultDevicePropertiesFile(const HostEnvironment& environment) {
+std::string besideDefaultConfiguration(const HostEnvironment& environment, std::string_view name) {
   const std::string configuration = defaultConfigurationFile(environment);
-  return configuration.empty() ? std::string() : configuration.substr(0, configuration.rfind('/')) + "/device.json";
+  return configuration.empty() ? std::string() : configuration.substr(0, configuration.rfind('/') + 1).append(name);
+}
+
+std::string defaultDevicePropertiesFile(const HostEnvironment& environment) {
+  return besideDefaultConfiguration(environment, "device.json");
 }
 
 std::optional<std::string> defaultStateDirectory(const HostEnvironment& environment) {

@@ -35,7 +35,8 @@ std::vector<std::string> serviceSocketPaths(const HostEnvironment& environment);
 // PREFIX/etc/tarnreporting/tarnreportingd.toml, but /etc/... for the prefix /usr and /etc/PREFIX/... for one in /opt.
 // Empty when the program's place isn't known.
 std::string defaultConfigurationFile(const HostEnvironment& environment);
-// What the device is: device.json beside that configuration. Empty when the program's place isn't known.
+// A file beside that configuration: "device.json" tells what the device is. Empty when the program's place isn't known.
+std::string besideDefaultConfiguration(const HostEnvironment& environment, std::string_view name);
 std::string defaultDevicePropertiesFile(const HostEnvironment& environment);
 // $XDG_STATE_HOME/tarnreporting, without it ~/.local/state/tarnreporting, for root /var/lib/tarnreporting; nothing when
 // there is no home either.
