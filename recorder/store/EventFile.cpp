@@ -350,11 +350,13 @@ Status EventFile::checkpointIfDue() {
   if (!isDue || (bytes < 2 * logLimit_ && !bringInFailed_ && checkpointer_.begin())) return {};
   checkpointer_.finish();
   int pages = 0;
-  const int code = sqlite3_wal_checkpoint_v2(connection_.handle(), nullptr, SQLITE_CHECKPOINT_PASSIVE, &pages, nullptr);
-  // A reader in the way is no fault: the rest is brought in later.
+  int broughtIn = 0;
+  const int code =
+      sqlite3_wal_checkpoint_v2(connection_.handle(), nullptr, SQLITE_CHECKPOINT_PASSIVE, &pages, &broughtIn);
+  // A reader in the way is no fault: the rest is brought in later, and until then the log is as long as it is.
   if ((code & 0xFF) == SQLITE_BUSY) return {};
   bringInFailed_ = code != SQLITE_OK;
-  if (!bringInFailed_) {
+  if (!bringInFailed_ && broughtIn == pages) {
     logPages_ = 0;
   }
   return connection_.errorOf(code);

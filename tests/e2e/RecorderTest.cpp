@@ -1,10 +1,12 @@
 // SPDX-License-Identifier: Apache-2.0
 // What the recorder's file goes through: damage, retention, patterns; and that the ledger adds up.
+#include <sqlite3.h>
 #include <unistd.h>
 
 #include <csignal>
 #include <filesystem>
 
+#include "recorder/store/rows/Connection.h"
 #include "tests/e2e/support/ServiceFixture.h"
 
 namespace tarn::e2e {
@@ -64,6 +66,36 @@ TEST_F(RecorderFile, TheOldestEventsGoWhenTheFileGrowsTooLarge) {
   EXPECT_LT(left.size(), 800U);
   EXPECT_GT(left.front().id, 1);
   EXPECT_EQ(left.back().payload.at("number"), 399);
+}
+
+TEST_F(RecorderFile, AReaderThatHoldsUpTheLogIsNamedOnceAndLosesNobodyAnything) {
+  ASSERT_TRUE(startService());
+  const auto client = connect();
+  ASSERT_TRUE(client->call(client::createReportingSession(1)).ok());
+  const auto send = [&](int first, int count) {
+    const std::string text(120'000, 'x');
+    for (int number = first; number < first + count; ++number) {
+      const plist::Dictionary message{{"number", number}, {"text", text + std::to_string(number)}};
+      ASSERT_EQ(client->send(client::sendMessage(message, 4, 1, std::vector<std::int64_t>{1})),
+                client::SendStatus::Sent);
+    }
+    ASSERT_TRUE(client->call(client::settle(), kDeadline).ok());
+  };
+  send(0, 1);
+  recorder::Connection reader;
+  ASSERT_EQ(reader.open(database(), SQLITE_OPEN_READONLY), SQLITE_OK);
+  ASSERT_EQ(reader.run("BEGIN; SELECT count(*) FROM events"), SQLITE_OK);
+  constexpr int kMessages = 700;  // twice their bytes, as each is two events
+  send(1, kMessages);
+  const std::string held = "held up by readers of an old state: process " + std::to_string(::getpid()) + " (tests_e2e)";
+  EXPECT_TRUE(eventually([&] { return logSays(held); })) << serviceLog();
+  EXPECT_EQ(serviceLog().find(held), serviceLog().rfind(held));
+  ASSERT_EQ(reader.run("COMMIT"), SQLITE_OK);
+  reader.close();
+  send(kMessages + 1, 1);
+  const json ledger = ledgerAtRest();
+  EXPECT_EQ(ledger.at("recorder_failed"), 0);
+  EXPECT_EQ(ledger.at("recorder_committed"), ledger.at("recorder_handed_over"));
 }
 
 TEST_F(RecorderFile, EventsStandInTheOrderOfTheirMessages) {
