@@ -1,6 +1,7 @@
 # SPDX-License-Identifier: Apache-2.0
 """A PipeWire of the test's own on a private directory, the service, and the adapter between them."""
 
+import glob
 import json
 import os
 import shutil
@@ -76,6 +77,7 @@ class Machine:
             self.environment.pop(name, None)
         self.running = []
         self.before = 0
+        self.waits = {}  # of each thread, in nanoseconds
         self.log = open(os.path.join(self.folder, "adapter.log"), "ab")
 
     # Programs
@@ -141,12 +143,19 @@ class Machine:
             return file.read()
 
     def waited(self):
-        """How long PipeWire and the adapter waited for a processor while they had something to do, in seconds."""
-        nanoseconds = 0
-        for process in (self.pipewire, self.adapter):
-            with open(f"/proc/{process.pid}/schedstat", encoding="utf-8") as file:
-                nanoseconds += int(file.read().split()[1])
-        return nanoseconds / 1e9
+        """How long threads of PipeWire, its session manager, the adapter and the programs that ended meanwhile waited
+        for a processor while they had something to do, in seconds."""
+        for process in (self.pipewire, self.adapter, *([self.manager] if self.managed else [])):
+            self.look_at_waits(process)
+        return sum(self.waits.values()) / 1e9
+
+    def look_at_waits(self, process):
+        for path in glob.glob(f"/proc/{process.pid}/task/*/schedstat"):
+            try:
+                with open(path, encoding="utf-8") as file:
+                    self.waits[path] = int(file.read().split()[1])
+            except (FileNotFoundError, ProcessLookupError):
+                pass  # it has just ended
 
     def mark(self):
         """From here on times are looked at."""
@@ -220,7 +229,11 @@ class Machine:
     def finish(self, *processes):
         for process in processes:
             process = getattr(process, "process", process)
-            process.wait(PATIENCE)
+            until = time.monotonic() + PATIENCE
+            while process.poll() is None and time.monotonic() < until:
+                self.look_at_waits(process)
+                time.sleep(0.02)
+            process.wait(0)
             self.running.remove(process)
 
     # What is recorded
