@@ -52,12 +52,23 @@ def end(context, figures, service, kills):
         context.fail(f"no start after end {figures['ends']}: {service.log_text()[-500:]}")
 
 
+def state_of(service):
+    """What the service says of itself that may tell why a program's end wasn't served."""
+    with service.connect() as client:
+        status = client.call(wire.STATUS)
+    told = ("rings", "ring_", "requests_", "messages_", "sessions", "connections_", "replies_", "recorder_waiting",
+            "queue", "out_of_memory")
+    return "the service: " + ", ".join(f"{name} {value}" for name, value in sorted(status.items())
+                                       if name.startswith(told))
+
+
 def look(context, figures, service, posters, kills):
     for poster in posters:
         status, complaints = poster.end()
         if status != 0:
             figures["odd_posters"] += 1
-            context.fail(f"a program that posts ended with {status} after {figures['ends']} ends: {complaints[-300:]}")
+            context.fail(f"a program that posts ended with {status} after {figures['ends']} ends, the last ones "
+                         f"{'kills' if kills else 'stops'}: {complaints[-300:]}; {state_of(service)}")
     with service.connect() as client:
         if not eventually(lambda: client.call(wire.STATUS)["rings_open"] == 0):
             context.fail("the rings of programs that ended stay open")

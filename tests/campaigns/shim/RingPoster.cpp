@@ -107,5 +107,8 @@ int main(int count, char** words) {
   }
   std::uint64_t left = 0;
   check(tarnreporting_client_close(client, kCloseMs, &left));
+  if (left != 0) {
+    std::fprintf(stderr, "ring_poster: %llu messages are left\n", static_cast<unsigned long long>(left));
+  }
   return oddResults == 0 && left == 0 ? 0 : 1;
 }
