@@ -1,11 +1,13 @@
 # SPDX-License-Identifier: Apache-2.0
 """A made-up device: a store as the recorder writes it, and the real tarnreporting-export beside it."""
 
+import json
 import os
 import sqlite3
 import subprocess
 import time
 
+RECORDED = 1795158000  # epoch seconds
 TABLES = """
 PRAGMA journal_mode = WAL;
 PRAGMA user_version = 1;
@@ -76,17 +78,24 @@ class Device:
             self.store.executemany(
                 "INSERT INTO event_texts VALUES(?, 'tally', 'sys.oxbow.tarnkit.Volume.Summary', '{}')",
                 [(2 * each + 1,) for each in ids])
-            self.store.executemany("INSERT INTO event_rows VALUES(?, 1795158000, 0, 0, NULL, 1)",
-                                   [(each,) for each in ids])
+            self.store.executemany("INSERT INTO event_rows VALUES(?, ?, 0, 0, NULL, 1)",
+                                   [(each, RECORDED) for each in ids])
         self.last += count
 
-    def start(self, *words):
+    def command(self, *words):
+        return [self.program, "--config", os.path.join(self.folder, "export.toml"), "--state-dir", self.state,
+                "--own-dir", self.own, "--machine-id", os.path.join(self.folder, "machine-id"), "--log-level", "debug",
+                *words]
+
+    def status(self):
+        """What --status prints."""
+        done = subprocess.run(self.command("--status"), capture_output=True, text=True, timeout=30, check=True)
+        return json.loads(done.stdout)
+
+    def start(self, *words, **variables):
         self.processes = [each for each in self.processes if each.poll() is None]
         with open(self.log, "ab") as log:
-            process = subprocess.Popen(
-                [self.program, "--config", os.path.join(self.folder, "export.toml"), "--state-dir", self.state,
-                 "--own-dir", self.own, "--machine-id", os.path.join(self.folder, "machine-id"), "--log-level",
-                 "debug", *words], stdout=log, stderr=log)
+            process = subprocess.Popen(self.command(*words), stdout=log, stderr=log, env={**os.environ, **variables})
         self.processes.append(process)
         return process
 

@@ -6,6 +6,7 @@ import random
 import re
 import shutil
 import signal
+import socket
 import sys
 import tempfile
 import time
@@ -13,7 +14,7 @@ import unittest
 
 sys.path.insert(0, os.path.dirname(os.path.abspath(__file__)))
 import nats  # noqa: E402
-from exporting import Device, eventually  # noqa: E402
+from exporting import RECORDED, Device, eventually  # noqa: E402
 
 EXPORT = os.environ["EXPORT"]
 MESSAGE_ID = re.compile(r"Nats-Msg-Id: *([0-9a-f]{32})\.(\d+)-(\d+)\.[0-9a-f]{32}")
@@ -107,6 +108,50 @@ class JetStream(unittest.TestCase):
         with self.server.client() as client:
             client.change_stream(max_msgs=-1)
         self.assertTrue(eventually(lambda: self.device.cursor() == 200), self.device.logged())
+
+    def test_status_tells_how_far_it_is_and_what_went_wrong(self):
+        self.device.record(100)
+        self.assertEqual(self.device.status().keys(), {"kind", "mode", "running", "arrived", "queue_seconds"})
+        self.assertFalse(self.device.status()["running"])
+        begun = time.time()
+        process = self.device.start()
+        self.assertTrue(eventually(lambda: "last_error" in self.device.status()))
+        status = self.device.status()
+        self.assertEqual((status["mode"], status["running"], status["arrived"]), ("export", True, 0))
+        self.assertAlmostEqual(status["queue_seconds"], max(0, time.time() - RECORDED), delta=5)
+        self.assertIn(f"127.0.0.1:{self.server.port}: ", status["last_error"])
+        self.assertAlmostEqual(status["last_error_time"], begun, delta=10)
+        self.server.start()
+        self.make_stream()
+        self.assertTrue(eventually(lambda: self.device.cursor() == 100), self.device.logged())
+        process.send_signal(signal.SIGTERM)
+        self.assertEqual(process.wait(10), 0)
+        status = self.device.status()
+        self.assertEqual((status["running"], status["arrived"], status["queue_seconds"]), (False, 100, 0))
+        self.assertGreaterEqual(status["last_success_time"], status["last_error_time"])
+        self.device.configure("", mode="off")
+        self.assertEqual(self.device.status(), {"kind": "status", "mode": "off"})
+
+    def test_the_service_manager_is_told_when_that_changes(self):
+        manager = socket.socket(socket.AF_UNIX, socket.SOCK_DGRAM)
+        self.addCleanup(manager.close)
+        manager.bind(os.path.join(self.folder, "notify"))
+        manager.settimeout(20)
+        self.device.start(NOTIFY_SOCKET=os.path.join(self.folder, "notify"))
+
+        def told(text):
+            until = time.monotonic() + 20
+            while time.monotonic() < until:
+                if text in manager.recv(4096).decode():
+                    return True
+            return False
+
+        self.assertTrue(told("STATUS=up to event 0 all has arrived"))
+        self.device.record(100)
+        self.assertTrue(told("STATUS=up to event 0 all has arrived; messages aren't taken for "))
+        self.server.start()
+        self.make_stream()
+        self.assertTrue(told("STATUS=up to event 100 all has arrived"))
 
     def test_settings_that_are_wrong_are_told_and_end_it(self):
         self.device.configure(f"urls = \"{self.server.url}\"\nauthority_file = \"{self.folder}/none\"")
