@@ -14,9 +14,11 @@ namespace {
 
 constexpr const char* kProgram = "tarnreporting-export";
 constexpr const char* kFooter =
-    "Nothing leaves unless the configuration says so; --show may be asked for at any time and sends nothing.\n"
+    "Nothing leaves unless the configuration says so; --show and --status may be asked for at any time and send\n"
+    "nothing.\n"
     "\n"
-    "Exit status: 0 after SIGTERM, SIGINT, --show, --once, --help and --version, and when the configuration says off;\n"
+    "Exit status: 0 after SIGTERM, SIGINT, --show, --status, --once, --help and --version, and when the configuration "
+    "says off;\n"
     "1 when it can't do what was asked; 64 for wrong usage; 78 for a wrong configuration file.";
 
 std::string checkNotEmpty(const std::string& text) {
@@ -103,6 +105,8 @@ void describeExportCommand(CLI::App& app, ExportOptionTexts& texts) {
   app.add_option("--since", texts.since, "With --show: only what was recorded from then on (2026-11-20, -1h, today)")
       ->type_name("T")
       ->check(checkNotEmpty);
+  app.add_flag("--status", options.status, "Print how far it is, what waits and its last error, as a line of JSON")
+      ->excludes("--show");
   app.add_flag("--once", options.once, "Exit when all that is there has left");
   app.add_option("--log-level", texts.logLevel, "Least level that is logged: debug, default or error")
       ->capture_default_str()

@@ -27,6 +27,7 @@ struct ExportOptions {
   std::string ownDirectory;    // where the cursor lies
   std::string machineId = "/etc/machine-id";
   bool show = false;
+  bool status = false;
   std::optional<std::string> since;  // as it was given
   bool once = false;                 // ends when all that is there has left
   LogLevel logLevel = LogLevel::Default;

@@ -8,8 +8,10 @@
 #include <utility>
 
 #include "fleet/export/Exporter.h"
+#include "fleet/export/Health.h"
 #include "fleet/publish/FolderPublisher.h"
 #include "fleet/publish/JetStreamPublisher.h"
+#include "host/loop/ServiceManager.h"
 #include "host/system/FileLock.h"
 #include "host/system/Files.h"
 #include "host/system/SystemError.h"
@@ -30,6 +32,8 @@ constexpr std::chrono::milliseconds kRest{500};
 constexpr std::chrono::milliseconds kWait{200};
 // What a store or a disk that fails is left alone for.
 constexpr double kSecondsAfterFault = 1;
+// Whoever asks for the status holds the lock for a moment.
+constexpr std::chrono::milliseconds kLockPatience{200};
 // For what is on its way when a signal ends it.
 constexpr std::chrono::seconds kLastWait{2};
 
@@ -40,37 +44,6 @@ std::chrono::nanoseconds monotonicNow() {
 ExportClock clockNow() {
   return {ctl::currentTime(), monotonicNow()};
 }
-
-// Tells when messages begin to fail and when they arrive again, and nothing in between.
-class Journal {
- public:
-  explicit Journal(const ProgramLog& log) : log_(log) {}
-
-  void note(const SendWindow& window, std::chrono::nanoseconds now) {
-    const bool fails = window.failures() > 0;
-    if (fails && !fails_) {
-      since_ = now;
-      log_.write(LogLevel::Default, "messages aren't taken: " + window.counts().lastError);
-    } else if (!fails && fails_) {
-      const auto seconds = std::chrono::duration_cast<std::chrono::seconds>(now - since_).count();
-      log_.write(LogLevel::Default, "messages are taken again, after " + std::to_string(seconds) + " s");
-    }
-    fails_ = fails;
-  }
-  // A fault of the store or the disk, once until it is another one.
-  void note(const Status& status) {
-    if (status.failed() && status->text != fault_) {
-      log_.write(LogLevel::Error, status->text);
-    }
-    fault_ = status.failed() ? status->text : "";
-  }
-
- private:
-  const ProgramLog& log_;
-  bool fails_ = false;
-  std::chrono::nanoseconds since_{};
-  std::string fault_;
-};
 
 Result<std::unique_ptr<Publisher>> publisherOf(const ExportOptions& options, const ExportConfiguration& configuration,
                                                const std::string& device) {
@@ -109,8 +82,8 @@ class Program {
     ctl::stopOnSignals();
     while (!ctl::isStopRequested()) {
       const Status status = exporter_.step(clockNow(), kWait);
-      journal_.note(status);
-      journal_.note(window_, monotonicNow());
+      health_.note(status);
+      health_.note(exporter_, window_, clockNow());
       if (status.failed()) {
         if (options_.once) return kExitFailure;
         ctl::pauseUnlessStopped(std::chrono::duration<double>(kSecondsAfterFault));
@@ -128,7 +101,7 @@ class Program {
   void finish() {
     const auto until = monotonicNow() + kLastWait;
     while (!window_.isEmpty() && window_.failures() == 0 && monotonicNow() < until) {
-      journal_.note(exporter_.settle(clockNow(), kWait));
+      health_.note(exporter_.settle(clockNow(), kWait));
     }
     log_.write(LogLevel::Debug, "arrived: up to event " + std::to_string(exporter_.arrived()));
   }
@@ -140,7 +113,8 @@ class Program {
   CursorFile cursor_;
   SendWindow window_;
   Exporter exporter_;
-  Journal journal_{log_};
+  linux_host::ServiceManager manager_;
+  Health health_{log_, manager_, options_.ownDirectory};
 };
 
 }  // namespace
@@ -157,7 +131,7 @@ int runExport(const ExportOptions& options, const ExportConfiguration& configura
   }
   // Two of them would undo each other's cursor.
   linux_host::FileLock lock;
-  if (const Status taken = lock.take(options.ownDirectory + "/lock", {}); taken.failed()) {
+  if (const Status taken = lock.take(options.ownDirectory + "/lock", kLockPatience); taken.failed()) {
     return fail({0, options.ownDirectory + ": another one works with it"});
   }
   const auto publisher = publisherOf(options, configuration, device);

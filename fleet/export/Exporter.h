@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // Exporter: carries a store's records to a publisher: read, make a message, send, and remember how far it is once that
-// is acknowledged. One step never waits longer than it is told.
+// is acknowledged. One step waits no longer than it is told, but for a connection to the publisher's server.
 //
 // Threads: one. It owns nothing that it is handed.
 #pragma once

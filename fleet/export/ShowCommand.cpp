@@ -7,7 +7,7 @@
 #include <cmath>
 
 #include "fleet/export/BatchMaker.h"
-#include "plist/EscapedText.h"
+#include "fleet/export/JsonLine.h"
 #include "plist/Hex.h"
 
 namespace tarn::fleet {
@@ -18,45 +18,8 @@ constexpr std::size_t kRowsAtOnce = 1000;
 constexpr double kSecondsPerDay = 86400;
 constexpr double kMicroseconds = 1e6;
 
-// One object on a line.
-class Line {
- public:
-  Line(std::string& out, std::string_view kind) : out_(out) { text("kind", kind); }
-  ~Line() { out_ += "}\n"; }
-  Line(const Line&) = delete;
-  Line& operator=(const Line&) = delete;
-
-  void text(std::string_view key, std::string_view value) {
-    begin(key);
-    plist::appendJsonText(out_, value);
-  }
-  void number(std::string_view key, double value) {
-    std::array<char, 32> digits{};
-    const auto end = std::to_chars(digits.begin(), digits.end(), value).ptr;
-    raw(key, std::isfinite(value) ? std::string_view(digits.data(), static_cast<std::size_t>(end - digits.begin()))
-                                  : std::string_view("null"));
-  }
-  void number(std::string_view key, std::int64_t value) { raw(key, std::to_string(value)); }
-  // JSON already.
-  void raw(std::string_view key, std::string_view value) {
-    begin(key);
-    out_ += value;
-  }
-
- private:
-  void begin(std::string_view key) {
-    out_ += isFirst_ ? "{" : ",";
-    isFirst_ = false;
-    plist::appendJsonText(out_, key);
-    out_ += ':';
-  }
-
-  std::string& out_;
-  bool isFirst_ = true;
-};
-
 void appendRun(std::string& out, const v1::Run& run) {
-  Line line(out, "run");
+  JsonLine line(out, "run");
   line.number("id", run.id());
   line.text("boot", run.boot());
   line.number("started", run.started());
@@ -69,7 +32,7 @@ void appendRun(std::string& out, const v1::Run& run) {
 }
 
 void appendSession(std::string& out, const v1::Session& session, const v1::Batch& batch) {
-  Line line(out, "session");
+  JsonLine line(out, "session");
   line.number("id", session.id());
   line.number("run", batch.runs(static_cast<int>(session.run())).id());
   line.text("process", session.process());
@@ -99,7 +62,7 @@ void appendSession(std::string& out, const v1::Session& session, const v1::Batch
 }
 
 void appendEvent(std::string& out, const v1::Event& event, const v1::Batch& batch) {
-  Line line(out, "event");
+  JsonLine line(out, "event");
   const v1::Kind& kind = batch.kinds(static_cast<int>(event.kind()));
   line.number("id", batch.first() + event.ahead());
   line.number("time", event.time());
@@ -137,7 +100,7 @@ Status showBatch(v1::Batch& batch, MessagePacker& packer, Total& total, std::ost
 void showTotal(const Total& total, std::optional<double> since, double now, std::ostream& out) {
   std::string text;
   {
-    Line line(text, "total");
+    JsonLine line(text, "total");
     line.number("events", total.events);
     line.number("messages", total.messages);
     line.number("bytes", total.bytes);
@@ -154,7 +117,7 @@ void showTotal(const Total& total, std::optional<double> since, double now, std:
 
 void appendBatch(std::string& out, const v1::Batch& batch) {
   {
-    Line line(out, "batch");
+    JsonLine line(out, "batch");
     std::string device;
     plist::appendHex(device, std::string_view(batch.device()));
     line.text("device", device);

@@ -8,6 +8,7 @@
 
 #include "fleet/export/ExportOptions.h"
 #include "fleet/export/ExportProgram.h"
+#include "fleet/export/Health.h"
 #include "fleet/export/ShowCommand.h"
 #include "host/settings/HostPaths.h"
 #include "host/system/SmallFile.h"
@@ -65,10 +66,18 @@ int show(const ExportOptions& options, const ExportConfiguration& configuration)
   return shown.failed() ? refuse(*shown, kExitFailure) : 0;
 }
 
+int tellStatus(const ExportOptions& options, Mode mode) {
+  StoreTail store(options.stateDirectory + kStore);
+  const Status told = showStatus(options, mode, store, ctl::currentTime(), std::cout);
+  std::cout.flush();
+  return told.failed() ? refuse(*told, kExitFailure) : 0;
+}
+
 int run(const ExportOptions& options) {
   const Result<ExportConfiguration> configuration = readExportConfiguration(options);
   if (configuration.failed()) return refuse(*configuration.error, kExitConfiguration);
   if (options.show) return show(options, configuration.value);
+  if (options.status) return tellStatus(options, configuration.value.rules.mode);
   // Before anything else is done: no socket, no file.
   if (configuration.value.rules.mode == Mode::Off) return 0;
   const Result<FleetKey> key = readKey(configuration.value.keyFile);

@@ -4,7 +4,6 @@
 #include <unordered_map>
 #include <utility>
 
-#include "fleet/publish/NatsConnection.h"
 #include "plist/ThreadSafety.h"
 
 namespace tarn::fleet {
@@ -18,21 +17,9 @@ constexpr std::int64_t kCloseMilliseconds = 5000;
 
 }  // namespace
 
-// What the library's threads reach. They are over before it is.
-class JetStreamPublisher::Link {
+// What the library's threads reach.
+class JetStreamPublisher::Answers {
  public:
-  NatsOwned<natsConnection> connection;
-  NatsOwned<jsCtx> context;
-
-  ~Link() {
-    if (connection) {
-      natsConnection_Close(connection.get());
-    }
-    context.reset();
-    connection.reset();
-    nats_CloseAndWait(kCloseMilliseconds);
-  }
-
   void expect(const std::string& id, std::uint64_t number) {
     const MutexLock lock(mutex_);
     numbers_[id] = number;
@@ -46,8 +33,16 @@ class JetStreamPublisher::Link {
                     std::make_move_iterator(outcomes_.end()));
     outcomes_.clear();
   }
+  // Nothing that is on its way will be answered.
+  void lose(const Error& why) {
+    const MutexLock lock(mutex_);
+    for (const auto& [id, number] : numbers_) {
+      outcomes_.push_back({number, why});
+    }
+    numbers_.clear();
+  }
   // One of the library's threads: `acknowledgement` of the message, or why there is none.
-  static void acknowledged(jsCtx*, natsMsg* message, jsPubAck* acknowledgement, jsPubAckErr* error, void* link) {
+  static void acknowledged(jsCtx*, natsMsg* message, jsPubAck* acknowledgement, jsPubAckErr* error, void* answers) {
     const NatsOwned<natsMsg> owned(message);
     const char* id = nullptr;
     if (natsMsgHeader_Get(message, "Nats-Msg-Id", &id) != NATS_OK) return;
@@ -56,7 +51,7 @@ class JetStreamPublisher::Link {
       const bool hasText = error != nullptr && error->ErrText != nullptr;
       status = Error{error != nullptr ? error->ErrCode : 0, hasText ? error->ErrText : "no acknowledgement"};
     }
-    static_cast<Link*>(link)->take(id, std::move(status));
+    static_cast<Answers*>(answers)->take(id, std::move(status));
   }
 
  private:
@@ -79,49 +74,70 @@ class JetStreamPublisher::Link {
 };
 
 JetStreamPublisher::JetStreamPublisher(const ServerSettings& settings, const std::string& device)
-    : settings_(settings), subject_(settings.subject + "." + device) {}
+    : settings_(settings), subject_(settings.subject + "." + device), answers_(std::make_unique<Answers>()) {}
 
-JetStreamPublisher::~JetStreamPublisher() = default;
+JetStreamPublisher::~JetStreamPublisher() {
+  disconnect();
+  nats_CloseAndWait(kCloseMilliseconds);
+}
 
 Status JetStreamPublisher::open() {
-  auto connection = connectToNats(settings_, "tarnreporting-export");
+  return checkNatsSettings(settings_);
+}
+
+void JetStreamPublisher::disconnect() {
+  if (connection_) {
+    natsConnection_Close(connection_.get());
+  }
+  context_.reset();
+  connection_.reset();
+}
+
+Status JetStreamPublisher::connect() {
+  disconnect();
+  auto connection = connectToNatsOnce(settings_, "tarnreporting-export");
   if (connection.failed()) return connection.error;
-  link_ = std::make_unique<Link>();
-  link_->connection = std::move(connection.value);
+  connection_ = std::move(connection.value);
   jsOptions options;
   jsOptions_Init(&options);
-  options.PublishAsync.AckHandler = &Link::acknowledged;
-  options.PublishAsync.AckHandlerClosure = link_.get();
+  options.PublishAsync.AckHandler = &Answers::acknowledged;
+  options.PublishAsync.AckHandlerClosure = answers_.get();
   options.PublishAsync.MaxPending = kMostPending;
   jsCtx* context = nullptr;
-  if (const natsStatus status = natsConnection_JetStream(&context, link_->connection.get(), &options);
-      status != NATS_OK) {
+  if (const natsStatus status = natsConnection_JetStream(&context, connection_.get(), &options); status != NATS_OK) {
     return natsError("JetStream", status);
   }
-  link_->context.reset(context);
+  context_.reset(context);
   return {};
 }
 
+bool JetStreamPublisher::isConnected() const {
+  return context_ && natsConnection_Status(connection_.get()) == NATS_CONN_STATUS_CONNECTED;
+}
+
 Status JetStreamPublisher::publish(std::uint64_t number, const std::string& id, const std::string& bytes) {
-  natsConnection* const connection = link_->connection.get();
-  if (natsConnection_Status(connection) != NATS_CONN_STATUS_CONNECTED) {
-    const char* why = nullptr;
-    natsConnection_GetLastError(connection, &why);
-    const std::string reason = why != nullptr && *why != '\0' ? why : "no server answers";
-    return Error{0, settings_.urls + ": " + reason};
+  if (!isConnected()) {
+    if (Status connected = connect(); connected.failed()) return connected;
   }
-  link_->expect(id, number);
+  answers_->expect(id, number);
   jsPubOptions options;
   jsPubOptions_Init(&options);
   options.MsgId = id.c_str();
   options.MaxWait = kAnswerMilliseconds;
   const natsStatus status =
-      js_PublishAsync(link_->context.get(), subject_.c_str(), bytes.data(), static_cast<int>(bytes.size()), &options);
+      js_PublishAsync(context_.get(), subject_.c_str(), bytes.data(), static_cast<int>(bytes.size()), &options);
   return status == NATS_OK ? Status() : Status(natsError(settings_.urls, status));
 }
 
 void JetStreamPublisher::wait(std::chrono::milliseconds longest, std::vector<Outcome>& outcomes) {
-  link_->wait(longest, outcomes);
+  if (context_ && !isConnected()) {
+    const char* why = nullptr;
+    natsConnection_GetLastError(connection_.get(), &why);
+    const std::string reason = why != nullptr && *why != '\0' ? why : "the connection was lost";
+    disconnect();
+    answers_->lose(Error{0, settings_.urls + ": " + reason});
+  }
+  answers_->wait(longest, outcomes);
 }
 
 }  // namespace tarn::fleet

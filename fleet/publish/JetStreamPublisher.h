@@ -1,7 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
-// JetStreamPublisher: a publisher to NATS JetStream, by its own library. It connects when it can and again when it was
-// cut off; meanwhile nothing is taken. Each message goes with its id as Nats-Msg-Id, by which the stream drops what it
-// has already.
+// JetStreamPublisher: a publisher to NATS JetStream, by its own library. A message that is to be published connects it,
+// where it isn't connected; that may wait a few seconds for each server, and who publishes chooses the pauses between
+// such tries. Each message goes with its id as Nats-Msg-Id, by which the stream drops what it has already.
 //
 // Threads: one at a time; the library's own hand over outcomes.
 #pragma once
@@ -9,6 +9,7 @@
 #include <memory>
 #include <string>
 
+#include "fleet/publish/NatsConnection.h"
 #include "fleet/publish/Publisher.h"
 #include "fleet/publish/ServerSettings.h"
 
@@ -22,18 +23,24 @@ class JetStreamPublisher final : public Publisher {
   JetStreamPublisher(const JetStreamPublisher&) = delete;
   JetStreamPublisher& operator=(const JetStreamPublisher&) = delete;
 
-  // Begins to connect, without waiting for it. The error: the settings are wrong, as a file that can't be read.
+  // Connects to nobody yet. The error: the settings are wrong, as a file that can't be read.
   [[nodiscard]] Status open();
 
   [[nodiscard]] Status publish(std::uint64_t number, const std::string& id, const std::string& bytes) override;
   void wait(std::chrono::milliseconds longest, std::vector<Outcome>& outcomes) override;
 
  private:
-  class Link;
+  class Answers;
+
+  [[nodiscard]] Status connect();
+  void disconnect();
+  bool isConnected() const;
 
   const ServerSettings settings_;
   const std::string subject_;
-  std::unique_ptr<Link> link_;
+  const std::unique_ptr<Answers> answers_;
+  NatsOwned<natsConnection> connection_;
+  NatsOwned<jsCtx> context_;
 };
 
 }  // namespace tarn::fleet

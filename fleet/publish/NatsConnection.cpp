@@ -2,6 +2,7 @@
 #include "fleet/publish/NatsConnection.h"
 
 #include <algorithm>
+#include <string_view>
 #include <utility>
 #include <vector>
 
@@ -9,7 +10,7 @@ namespace tarn::fleet {
 
 namespace {
 
-constexpr std::int64_t kConnectMilliseconds = 5000;
+constexpr std::int64_t kConnectMilliseconds = 3000;
 constexpr std::int64_t kReconnectMilliseconds = 2000;
 constexpr std::int64_t kJitterMilliseconds = 1000;
 constexpr std::int64_t kPingMilliseconds = 10'000;
@@ -64,16 +65,36 @@ Status setSecrets(natsOptions* options, const ServerSettings& settings) {
 // Whoever asks looks at the state of the connection.
 void connected(natsConnection*, void*) {}
 
+// The library's own words, without the place in its source that it puts before them.
+std::string reasonIn(std::string_view text) {
+  const std::size_t place = text.starts_with('(') ? text.find("): ") : std::string_view::npos;
+  text.remove_prefix(place == std::string_view::npos ? 0 : place + 3);
+  // A server that doesn't accept a certificate closes the connection without a word.
+  if (text == "Expected 'PONG', got ''") {
+    return "the server hung up on the greeting; its log tells why (a certificate that it misses or that expired?)";
+  }
+  return std::string(text);
+}
+
 natsStatus setPace(natsOptions* options, const std::string& name) {
   const natsStatus results[] = {
       natsOptions_SetName(options, name.c_str()),
       natsOptions_SetTimeout(options, kConnectMilliseconds),
+      natsOptions_SetPingInterval(options, kPingMilliseconds),
+      natsOptions_SetMaxPingsOut(options, kMostPings),
+  };
+  for (const natsStatus status : results) {
+    if (status != NATS_OK) return status;
+  }
+  return NATS_OK;
+}
+
+natsStatus setToGoOn(natsOptions* options) {
+  const natsStatus results[] = {
       natsOptions_SetMaxReconnect(options, -1),
       natsOptions_SetReconnectWait(options, kReconnectMilliseconds),
       natsOptions_SetReconnectJitter(options, kJitterMilliseconds, kJitterMilliseconds),
       natsOptions_SetReconnectBufSize(options, kReconnectBytes),
-      natsOptions_SetPingInterval(options, kPingMilliseconds),
-      natsOptions_SetMaxPingsOut(options, kMostPings),
       // Its own callback, as it would wait for the first connection otherwise.
       natsOptions_SetRetryOnFailedConnect(options, true, connected, nullptr),
   };
@@ -83,25 +104,53 @@ natsStatus setPace(natsOptions* options, const std::string& name) {
   return NATS_OK;
 }
 
+Result<NatsOwned<natsOptions>> makeOptions(const ServerSettings& settings, const std::string& name) {
+  natsOptions* made = nullptr;
+  if (const natsStatus status = natsOptions_Create(&made); status != NATS_OK) return {{}, natsError("NATS", status)};
+  NatsOwned<natsOptions> options(made);
+  if (const natsStatus status = setServers(made, settings.urls); status != NATS_OK) {
+    return {{}, natsError(settings.urls, status)};
+  }
+  if (const natsStatus status = setPace(made, name); status != NATS_OK) return {{}, natsError("NATS", status)};
+  if (Status set = setSecrets(made, settings); set.failed()) return {{}, std::move(set)};
+  return {std::move(options), {}};
+}
+
 }  // namespace
 
 Error natsError(const std::string& what, natsStatus status) {
   return {status, what + ": " + natsStatus_GetText(status)};
 }
 
+Status checkNatsSettings(const ServerSettings& settings) {
+  return makeOptions(settings, "check").error;
+}
+
 Result<NatsOwned<natsConnection>> connectToNats(const ServerSettings& settings, const std::string& name) {
-  natsOptions* made = nullptr;
-  if (const natsStatus status = natsOptions_Create(&made); status != NATS_OK) return {{}, natsError("NATS", status)};
-  const NatsOwned<natsOptions> options(made);
-  if (const natsStatus status = setServers(made, settings.urls); status != NATS_OK) {
-    return {{}, natsError(settings.urls, status)};
+  const Result<NatsOwned<natsOptions>> options = makeOptions(settings, name);
+  if (options.failed()) return {{}, options.error};
+  if (const natsStatus status = setToGoOn(options.value.get()); status != NATS_OK) {
+    return {{}, natsError("NATS", status)};
   }
-  if (const natsStatus status = setPace(made, name); status != NATS_OK) return {{}, natsError("NATS", status)};
-  if (Status set = setSecrets(made, settings); set.failed()) return {{}, std::move(set)};
   natsConnection* connection = nullptr;
-  const natsStatus status = natsConnection_Connect(&connection, made);
+  const natsStatus status = natsConnection_Connect(&connection, options.value.get());
   if (status != NATS_OK && status != NATS_NOT_YET_CONNECTED) return {{}, natsError(settings.urls, status)};
   return {NatsOwned<natsConnection>(connection), {}};
+}
+
+Result<NatsOwned<natsConnection>> connectToNatsOnce(const ServerSettings& settings, const std::string& name) {
+  const Result<NatsOwned<natsOptions>> options = makeOptions(settings, name);
+  if (options.failed()) return {{}, options.error};
+  if (const natsStatus status = natsOptions_SetAllowReconnect(options.value.get(), false); status != NATS_OK) {
+    return {{}, natsError("NATS", status)};
+  }
+  natsConnection* connection = nullptr;
+  const natsStatus status = natsConnection_Connect(&connection, options.value.get());
+  if (status == NATS_OK) return {NatsOwned<natsConnection>(connection), {}};
+  const char* const text = nats_GetLastError(nullptr);
+  const std::string why = text != nullptr ? reasonIn(text) : "";
+  if (why.empty()) return {{}, natsError(settings.urls, status)};
+  return {{}, Error{status, settings.urls + ": " + why}};
 }
 
 }  // namespace tarn::fleet

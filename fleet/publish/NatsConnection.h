@@ -1,6 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
-// NatsConnection: a connection to NATS servers by these settings, for publishing and for pulling: it goes on trying for
-// ever. Threads: the library's calls are for any.
+// NatsConnection: a connection to NATS servers by these settings, for publishing and for pulling. Threads: the
+// library's calls are for any.
 #pragma once
 
 #include <nats/nats.h>
@@ -26,7 +26,12 @@ using NatsOwned = std::unique_ptr<Object, NatsDeleter>;
 // "what: why", by the library's words.
 Error natsError(const std::string& what, natsStatus status);
 
-// Begins to connect and doesn't wait for it. The error is one of the settings.
+// Whether files that the settings name can be used.
+[[nodiscard]] Status checkNatsSettings(const ServerSettings& settings);
+// Begins to connect and doesn't wait for it; goes on for ever. The error is one of the settings.
 Result<NatsOwned<natsConnection>> connectToNats(const ServerSettings& settings, const std::string& name);
+// One try, for a few seconds at most for each server; a connection that is lost stays lost. The error says why, as far
+// as the library knows.
+Result<NatsOwned<natsConnection>> connectToNatsOnce(const ServerSettings& settings, const std::string& name);
 
 }  // namespace tarn::fleet

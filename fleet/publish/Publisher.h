@@ -29,7 +29,7 @@ class Publisher {
  public:
   virtual ~Publisher() = default;
 
-  // Begins to send, without waiting. The error: it isn't taken now, and no outcome comes of it.
+  // Begins to send; waits for a connection at most. The error: it isn't taken now, and no outcome comes of it.
   [[nodiscard]] virtual Status publish(std::uint64_t number, const std::string& id, const std::string& bytes) = 0;
   // Waits until there is an outcome or the time is up, and appends those that are known.
   virtual void wait(std::chrono::milliseconds longest, std::vector<Outcome>& outcomes) = 0;

@@ -22,8 +22,8 @@ def free_port():
 class Server:
     """Started and killed as often as a test likes; it keeps its port and its directory."""
 
-    def __init__(self, folder, extra=""):
-        self.port, self.process = free_port(), None
+    def __init__(self, folder, extra="", tls=None):
+        self.port, self.process, self.tls = free_port(), None, tls
         self.configuration = os.path.join(folder, "nats.conf")
         self.log = os.path.join(folder, "nats.log")
         with open(self.configuration, "w", encoding="utf-8") as file:
@@ -39,12 +39,15 @@ class Server:
         until = time.monotonic() + PATIENCE
         while time.monotonic() < until:
             try:
-                with Client(self.port) as client:
+                with self.client() as client:
                     client.ask("$JS.API.INFO")
                     return
-            except (OSError, TimeoutError):
+            except OSError:
                 time.sleep(0.05)
         raise RuntimeError("nats-server doesn't answer")
+
+    def client(self):
+        return Client(self.port, self.tls)
 
     def end(self, how=signal.SIGKILL):
         if self.process and self.process.poll() is None:
@@ -55,10 +58,13 @@ class Server:
 class Client:
     """One connection; a question at a time."""
 
-    def __init__(self, port):
+    def __init__(self, port, tls=None):
         self.socket = socket.create_connection(("127.0.0.1", port), timeout=5)
+        while not self.socket.recv(1) == b"\n":  # INFO; what comes after it may be TLS
+            pass
+        if tls:
+            self.socket = tls.wrap_socket(self.socket, server_hostname="localhost")
         self.input = self.socket.makefile("rb")
-        self.input.readline()  # INFO
         self.socket.sendall(b'CONNECT {"verbose":false,"headers":true}\r\nSUB answer 1\r\nPING\r\n')
         self.line(b"PONG")
 

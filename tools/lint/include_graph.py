@@ -87,7 +87,7 @@ ROOMS = {
     "fleet/publish": VALUES + ("fleet/cursor", "host/system"),
     "fleet/export": VALUES + STORE + (
         "fleet/cursor", "fleet/publish", "fleet/format", "fleet/privacy", "fleet/program", "fleet/store",
-        "host/settings", "host/system", "tools/ctl/terminal", "wire"),
+        "host/loop", "host/settings", "host/system", "tools/ctl/terminal", "wire"),
     "tools/ctl": PROGRAM + ("client", "dictionary", "tools/script", "tools/ctl/terminal"),
     "tools/ctl/sessions": PROGRAM + ("tools/ctl", "tools/ctl/terminal", "tools/report", "tools/script"),
     "tools/ctl/views": PROGRAM + ("client", "tools/ctl", "tools/ctl/terminal", "tools/report"),
