@@ -88,6 +88,7 @@ ROOMS = {
     "fleet/export": VALUES + STORE + (
         "fleet/cursor", "fleet/publish", "fleet/format", "fleet/privacy", "fleet/program", "fleet/store",
         "host/loop", "host/settings", "host/system", "tools/ctl/terminal", "wire"),
+    "fleet/collect": VALUES + ("fleet/format", "fleet/program", "fleet/publish", "host/system", "tools/ctl/terminal"),
     "tools/ctl": PROGRAM + ("client", "dictionary", "tools/script", "tools/ctl/terminal"),
     "tools/ctl/sessions": PROGRAM + ("tools/ctl", "tools/ctl/terminal", "tools/report", "tools/script"),
     "tools/ctl/views": PROGRAM + ("client", "tools/ctl", "tools/ctl/terminal", "tools/report"),

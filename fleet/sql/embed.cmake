@@ -1,0 +1,16 @@
+# SPDX-License-Identifier: Apache-2.0
+# Makes a source of the steps of the database's layout: cmake -DOUT=FILE -DFOLDER=FOLDER -P embed.cmake
+file(GLOB steps "${FOLDER}/[0-9][0-9][0-9]_*.sql")
+list(SORT steps)
+set(text "#include \"fleet/collect/Schema.h\"\n\nnamespace tarn::fleet {\n\n")
+string(APPEND text "std::span<const SchemaStep> schemaSteps() {\n")
+string(APPEND text "  static constexpr SchemaStep kSteps[] = {\n")
+foreach(step IN LISTS steps)
+  get_filename_component(name "${step}" NAME_WE)
+  string(REGEX MATCH "^[0-9]+" version "${name}")
+  math(EXPR version "1${version} - 1000")
+  file(READ "${step}" sql)
+  string(APPEND text "    {${version}, \"${name}\", R\"step(${sql})step\"},\n")
+endforeach()
+string(APPEND text "  };\n  return kSteps;\n}\n\n}  // namespace tarn::fleet\n")
+file(WRITE "${OUT}" "${text}")
