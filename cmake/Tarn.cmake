@@ -43,6 +43,8 @@ add_link_options(-Wl,--build-id=sha1)
 # Nobody's folders in what is built: it is the same wherever the source lies. As seen from the build's folder, so that
 # it is also the same with a compiler's cache, which asks for files by such names.
 add_compile_options("-ffile-prefix-map=${PROJECT_SOURCE_DIR}=..")
+# The same for what is made of sources that lie in the build's folder, which a cache names by less still.
+set(TARN_MADE_SOURCES_OPTION "-ffile-prefix-map=${PROJECT_BINARY_DIR}/=")
 # Programs find the tree's libraries from where they stand themselves. An installation takes that out again, but the
 # table keeps the place, whose size would be that of a folder's name.
 set(CMAKE_BUILD_RPATH_USE_ORIGIN ON)
