@@ -68,6 +68,7 @@ Settings settingsOf(ExportConfiguration& configuration) {
           {"privacy", "key_file", takeText(configuration.keyFile)},
           {"server", "urls", takeServers(server.urls)},
           {"server", "subject", takeText(server.subject)},
+          {"server", "answer_seconds", takeWhole(server.answerSeconds, 1, 600)},
           {"server", "credentials_file", takeText(server.credentialsFile)},
           {"server", "authority_file", takeText(server.authorityFile)},
           {"server", "certificate_file", takeText(server.certificateFile)},

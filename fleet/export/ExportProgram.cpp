@@ -58,6 +58,14 @@ Result<std::unique_ptr<Publisher>> publisherOf(const ExportOptions& options, con
   return {std::move(publisher), {}};
 }
 
+// The publisher's library tells of what wasn't answered; where it doesn't, the window takes that for granted.
+WindowLimits limitsOf(const ServerSettings& settings) {
+  constexpr std::chrono::seconds kMore{2};
+  WindowLimits limits;
+  limits.patience = std::chrono::seconds(settings.answerSeconds) + kMore;
+  return limits;
+}
+
 class Program {
  public:
   Program(const ExportOptions& options, const ExportConfiguration& configuration, const FleetKey& key,
@@ -67,7 +75,7 @@ class Program {
         store_(options.stateDirectory + kStore),
         sieve_(configuration.rules, key),
         cursor_(options.ownDirectory + "/cursor"),
-        window_(publisher, Backoff(std::random_device()())),
+        window_(publisher, Backoff(std::random_device()()), limitsOf(configuration.server)),
         exporter_(store_, sieve_, device, cursor_, window_, publisher) {}
 
   int run() {

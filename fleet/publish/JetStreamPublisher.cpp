@@ -10,7 +10,7 @@ namespace tarn::fleet {
 
 namespace {
 
-constexpr std::int64_t kAnswerMilliseconds = 8000;
+constexpr std::int64_t kMilliseconds = 1000;
 constexpr std::int64_t kMostPending = 4096;
 // For the library's threads to end.
 constexpr std::int64_t kCloseMilliseconds = 5000;
@@ -123,7 +123,7 @@ Status JetStreamPublisher::publish(std::uint64_t number, const std::string& id, 
   jsPubOptions options;
   jsPubOptions_Init(&options);
   options.MsgId = id.c_str();
-  options.MaxWait = kAnswerMilliseconds;
+  options.MaxWait = settings_.answerSeconds * kMilliseconds;
   const natsStatus status =
       js_PublishAsync(context_.get(), subject_.c_str(), bytes.data(), static_cast<int>(bytes.size()), &options);
   return status == NATS_OK ? Status() : Status(natsError(settings_.urls, status));

@@ -40,6 +40,7 @@ CAMPAIGNS = {
     "ringkills": ("ringkills", "SIGKILL to programs that post to rings: what a ring calls posted is there, once"),
     "ringrestarts": ("ringrestarts", "the service ends and starts while programs post to rings: no call fails"),
     "streams": ("streams", "200 streams a minute of a real PipeWire: a session each, as long as it ran, none open"),
+    "export": ("exports", "exporters, a proxy that refuses, loses and reorders, kills: the stream has all, once"),
     "ends": ("ends", "SIGTERM at random moments under load: all that was answered is there, once"),
     "restarts": ("restarts", "restarts with the socket kept, under 5,000 messages a second of the libraries' programs"),
     "reloads": ("reloads", "the configuration is read anew under load, a tenth broken: no client notices"),

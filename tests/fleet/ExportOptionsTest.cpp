@@ -30,7 +30,7 @@ TEST(ExportOptions, AFileThatIsNotNamedNeedNotBeThere) {
 TEST(ExportOptions, TheConfigurationSaysWhatLeaves) {
   const auto read = parseExportConfiguration(
       "[privacy]\nmode = 'local'\nkeys = ['a', 'b*']\nhashed = []\nsample = 0.25\nrotate_days = 30\n"
-      "[server]\nurls = 'tls://one:4222,tls://two:4222'\n",
+      "[server]\nurls = 'tls://one:4222,tls://two:4222'\nanswer_seconds = 3\n",
       "export.toml");
   ASSERT_TRUE(read.ok()) << read.error.text();
   EXPECT_EQ(read.value.rules.mode, Mode::Local);
@@ -39,6 +39,7 @@ TEST(ExportOptions, TheConfigurationSaysWhatLeaves) {
   EXPECT_EQ(read.value.rules.sample, 0.25);
   EXPECT_EQ(read.value.rules.rotateDays, 30);
   EXPECT_EQ(read.value.server.urls, "tls://one:4222,tls://two:4222");
+  EXPECT_EQ(read.value.server.answerSeconds, 3);
 }
 
 constexpr const char* kNoServers =

@@ -45,8 +45,8 @@ def eventually(holds, patience=30):
 class Device:
     """All that is its own lies in a folder. close() ends what it started."""
 
-    def __init__(self, program, folder, machine="0123456789abcdef0123456789abcdef"):
-        self.program, self.folder = program, folder
+    def __init__(self, program, folder, machine="0123456789abcdef0123456789abcdef", number=0):
+        self.program, self.folder, self.number = program, folder, number
         self.state, self.own, self.log = (os.path.join(folder, name) for name in ("state", "own", "log"))
         os.makedirs(self.state)
         self.store = sqlite3.connect(os.path.join(self.state, "recorder.sqlite3"))
@@ -69,12 +69,15 @@ class Device:
         self.write("export.toml", f"[privacy]\nmode = \"{mode}\"\nkey_file = \"{self.folder}/fleet.key\"\n"
                    f"[server]\n{server}\n")
 
+    def payload(self, event):
+        return f'{{"play_seconds":{event},"session_duration":{self.number}}}'
+
     def record(self, count):
-        """Events whose play_seconds is their id."""
+        """Events that say their id and the device's number."""
         ids = range(self.last + 1, self.last + count + 1)
         with self.store:
             self.store.executemany("INSERT INTO event_texts VALUES(?, NULL, NULL, ?)",
-                                   [(2 * each, f'{{"play_seconds":{each}}}') for each in ids])
+                                   [(2 * each, self.payload(each)) for each in ids])
             self.store.executemany(
                 "INSERT INTO event_texts VALUES(?, 'tally', 'sys.oxbow.tarnkit.Volume.Summary', '{}')",
                 [(2 * each + 1,) for each in ids])
