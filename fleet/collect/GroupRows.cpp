@@ -4,6 +4,7 @@
 #include <algorithm>
 #include <chrono>
 #include <set>
+#include <tuple>
 #include <utility>
 
 #include "plist/Hex.h"
@@ -32,9 +33,17 @@ void addReason(CopyRows& rows, bool hasEnded, const std::string& reason) {
   }
 }
 
+// In one order, whoever writes: then of two writers with the same records one waits for the other, and never both.
+std::vector<const v1::Batch*> inOrder(std::vector<const v1::Batch*> batches) {
+  std::stable_sort(batches.begin(), batches.end(), [](const v1::Batch* one, const v1::Batch* other) {
+    return std::forward_as_tuple(one->device(), one->first()) < std::forward_as_tuple(other->device(), other->first());
+  });
+  return batches;
+}
+
 }  // namespace
 
-GroupRows::GroupRows(std::vector<const v1::Batch*> batches) : batches_(std::move(batches)) {
+GroupRows::GroupRows(std::vector<const v1::Batch*> batches) : batches_(inOrder(std::move(batches))) {
   std::size_t runs = 0;
   for (const v1::Batch* const batch : batches_) {
     plist::appendHex(names_.emplace_back(), std::string_view(batch->device()));
@@ -82,7 +91,7 @@ CopyRows GroupRows::events() const {
       const v1::Kind& kind = batch.kinds(static_cast<int>(event.kind()));
       const v1::Session* const session =
           event.session() == 0 ? nullptr : &batch.sessions(static_cast<int>(event.session()) - 1);
-      rows.begin(10);
+      rows.begin(11);
       rows.integer(device);
       rows.number(session == nullptr ? 0 : runs_.at(firstRun_[i] + session->run()));
       rows.number(batch.first() + event.ahead());
@@ -96,7 +105,13 @@ CopyRows GroupRows::events() const {
       rows.text(kind.name());
       rows.json(event.payload());
       rows.json(kind.detail());
-      rows.flag(isMeasured(kind, event));
+      if (isMeasured(kind, event)) {
+        rows.text(session == nullptr ? "" : session->application());
+        rows.text(session == nullptr ? "" : batch.runs(static_cast<int>(session->run())).version());
+      } else {
+        rows.null();
+        rows.null();
+      }
     }
   }
   return rows;

@@ -33,7 +33,8 @@ class GroupRows {
   // The database's keys, by number.
   void setRuns(std::vector<std::int64_t> keys) { runs_ = std::move(keys); }
 
-  // device, run, id, time, session, backend, name, payload, detail, is_measured
+  // device, run, id, time, session, backend, name, payload, detail, application, release; the last two are those of
+  // its session, and there where it is measured
   CopyRows events() const;
   // run, id, device, process, application, service_type, service_name, created, ended, end_reason, looked_at
   CopyRows sessions() const;

@@ -14,10 +14,12 @@ constexpr int kMostTurns = 5;
 
 // Of the connection alone, and empty after each transaction.
 constexpr const char* kSides = R"(
+SET temp_buffers = '64MB';
+SET work_mem = '64MB';
 CREATE TEMPORARY TABLE IF NOT EXISTS side_runs(number integer, device integer, id bigint, boot text, version text,
   started timestamptz, ended timestamptz, end_reason text, machine jsonb, looked_at bigint) ON COMMIT DELETE ROWS;
 CREATE TEMPORARY TABLE IF NOT EXISTS side_events(device integer, run bigint, id bigint, time timestamptz,
-  session bigint, backend text, name text, payload jsonb, detail jsonb, is_measured boolean) ON COMMIT DELETE ROWS;
+  session bigint, backend text, name text, payload jsonb, detail jsonb, application text, release text) ON COMMIT DELETE ROWS;
 CREATE TEMPORARY TABLE IF NOT EXISTS side_sessions(run bigint, id bigint, device integer, process text,
   application text, service_type bigint, service_name text, created timestamptz, ended timestamptz, end_reason text,
   looked_at bigint) ON COMMIT DELETE ROWS;
@@ -62,20 +64,15 @@ constexpr const char* kUnlessExpired = R"(
     WHERE NOT EXISTS (SELECT FROM expired AS x WHERE x.day = s.time::date AND x.device = s.device AND x.run = s.run AND
       x.ids @> s.id))";
 constexpr const char* kAddEventsTail = R"(
-    ORDER BY device, id
   ON CONFLICT DO NOTHING RETURNING device, run, id, time),
 measured AS (
   SELECT DISTINCT ON (s.device, s.id, s.run, s.time) date_trunc('hour', s.time) AS hour,
-      left(coalesce(s.payload ->> 'HostApplicationDisplayID', n.application, ''), 200) AS application,
-      left(coalesce(s.payload ->> 'active_devices', ''), 200) AS route, left(coalesce(r.version, ''), 200) AS release,
+      left(coalesce(s.payload ->> 'HostApplicationDisplayID', s.application), 200) AS application,
+      left(coalesce(s.payload ->> 'active_devices', ''), 200) AS route, left(s.release, 200) AS release,
       CASE WHEN s.name = 'sys.oxbow.tarnkit.Volume.Summary' THEN number_of(s.payload -> 'play_seconds') END AS played,
       number_of(s.payload -> 'KvSessionVolume') AS volume,
       (s.payload ->> 'issue_type' = 'overload' AND NOT s.payload ? 'overload_count')::integer AS overloads
-    FROM side_events AS s JOIN added AS a USING (device, run, id, time)
-      LEFT JOIN (SELECT DISTINCT ON (run, id) run, id, application FROM side_sessions ORDER BY run, id) AS n
-        ON n.run = s.run AND n.id = s.session
-      LEFT JOIN runs AS r ON r.key = s.run
-    WHERE s.is_measured),
+    FROM side_events AS s JOIN added AS a USING (device, run, id, time) WHERE s.release IS NOT NULL),
 hour AS (
   INSERT INTO hour_parts AS h
   SELECT hour, application, route, release, $1::smallint, count(played), coalesce(sum(played), 0),
