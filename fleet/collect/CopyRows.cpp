@@ -62,11 +62,6 @@ void CopyRows::number(std::int64_t value) {
   append(bytes_, value);
 }
 
-void CopyRows::flag(bool value) {
-  length(1);
-  bytes_ += value ? '\x01' : '\0';
-}
-
 void CopyRows::text(std::string_view value) {
   const std::string_view clean = cleanText(value, clean_);
   length(clean.size());

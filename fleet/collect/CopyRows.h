@@ -27,7 +27,6 @@ class CopyRows {
   void small(std::int16_t value);
   void integer(std::int32_t value);
   void number(std::int64_t value);
-  void flag(bool value);
   // Of text, with what the database doesn't take replaced.
   void text(std::string_view value);
   // Of a JSON document.

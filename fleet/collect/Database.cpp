@@ -24,7 +24,7 @@ std::string lineOf(std::string text) {
     text.pop_back();
   }
   for (char& c : text) {
-    c = c == '\n' ? ' ' : c;
+    c = c == '\n' || c == '\t' ? ' ' : c;
   }
   return text;
 }

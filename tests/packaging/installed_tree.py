@@ -171,6 +171,32 @@ class InstalledTree(unittest.TestCase):
             told = [line for line in done.stderr.splitlines() if "tarnreporting-export" in line]
             self.assertEqual(told, [])
 
+    def test_the_program_that_collects_is_there_with_its_unit_or_not_at_all(self):
+        program, unit = self.at("bin/tarnreporting-collect"), "lib/systemd/system/tarnreporting-collect.service"
+        example = self.at("etc/tarnreporting/collect.toml")
+        self.assertEqual([os.path.exists(path) for path in (self.at(unit), example)], 2 * [os.path.exists(program)])
+        if not os.path.exists(program):
+            return
+        settings = self.settings(unit)
+        self.assertEqual(shlex.split(settings["ExecStart"][0]), [program])
+        with open(self.at("lib/sysusers.d/tarnreporting-collect.conf"), encoding="utf-8") as file:
+            self.assertIn("u " + settings["User"][0] + " ", file.read())
+        with open(example, encoding="utf-8") as file:
+            lines = file.read().splitlines()
+        keys = [line[1:] for line in lines if line.startswith("#") and not line.startswith("# ") and " = " in line]
+        self.assertEqual(len(keys), 12)
+        shown = os.path.join(self.folder, "collect.toml")
+        with open(shown, "w", encoding="utf-8") as file:
+            file.write("\n".join(line[1:] if line[1:] in keys else line for line in lines).replace(
+                '"dbname=tarnreporting"', f'"host={self.folder} dbname=tarnreporting"') + "\n")
+        done = run(program, "--config", shown, "--migrate")
+        self.assertEqual(done.returncode, 1, done.stderr)
+        self.assertTrue(done.stderr.startswith("tarnreporting-collect: database: "), done.stderr)
+        if shutil.which("systemd-analyze"):
+            done = run("systemd-analyze", "verify", "--man=no", self.at(unit))
+            told = [line for line in done.stderr.splitlines() if "tarnreporting-collect" in line]
+            self.assertEqual(told, [])
+
     def test_the_installed_configuration_is_read_and_may_be_absent(self):
         path = self.at("etc/tarnreporting/tarnreportingd.toml")
         command = [self.at("bin", "tarnreportingd"), "--state-dir", path + "/none",

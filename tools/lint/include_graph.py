@@ -92,7 +92,7 @@ ROOMS = {
     "tools/ctl": PROGRAM + ("client", "dictionary", "tools/script", "tools/ctl/terminal"),
     "tools/ctl/sessions": PROGRAM + ("tools/ctl", "tools/ctl/terminal", "tools/report", "tools/script"),
     "tools/ctl/views": PROGRAM + ("client", "tools/ctl", "tools/ctl/terminal", "tools/report"),
-    "tools/manual": PROGRAM + ("tools/ctl", "adapters/pipewire", "fleet/export"),
+    "tools/manual": PROGRAM + ("tools/ctl", "adapters/pipewire", "fleet/collect", "fleet/export"),
     # What checks the service shares no code with it, but for the client and the reader of the recorder's file.
     "tests/scenario": VALUES + ("client", "wire", "recorder/store/rows", "recorder/store", "recorder/store/reading"),
 }

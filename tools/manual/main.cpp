@@ -8,6 +8,7 @@
 #include <string>
 
 #include "adapters/pipewire/AdapterOptions.h"
+#include "fleet/collect/CollectOptions.h"
 #include "fleet/export/ExportOptions.h"
 #include "host/settings/ServiceOptions.h"
 #include "tools/ctl/Command.h"
@@ -91,6 +92,13 @@ Json exportJson() {
   return commandJson(app);
 }
 
+Json collectJson() {
+  CLI::App app;
+  fleet::CollectOptionTexts texts;
+  fleet::describeCollectCommand(app, texts);
+  return commandJson(app);
+}
+
 Json toolJson() {
   CLI::App app;
   ctl::Context context;
@@ -104,8 +112,9 @@ Json toolJson() {
 
 int main() {
   using tarn::streams::Adapter;
-  const auto programs = tarn::Json::array({tarn::serviceJson(), tarn::toolJson(), tarn::adapterJson(Adapter::Alsa),
-                                           tarn::adapterJson(Adapter::PipeWire), tarn::exportJson()});
+  const auto programs =
+      tarn::Json::array({tarn::serviceJson(), tarn::toolJson(), tarn::adapterJson(Adapter::Alsa),
+                         tarn::adapterJson(Adapter::PipeWire), tarn::exportJson(), tarn::collectJson()});
   std::cout << programs.dump(1) << '\n';
   return std::cout.good() ? 0 : 1;
 }
