@@ -357,6 +357,7 @@ plist::Dictionary LinuxPlatform::status(std::optional<std::uint32_t> onlyUser) {
   status.set("quotas", connections_.quotaUse(onlyUser));
   status.set("out_of_memory", lossStatus());
   status.set("recorder_expired_by_user", expiredStatus(recorder_.expiredByOwner(), onlyUser));
+  status.set("recorder_expired_unexported", unexportedStatus(recorder_.unexported()));
   return status;
 }
 

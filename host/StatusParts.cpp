@@ -20,6 +20,15 @@ plist::Dictionary expiredStatus(const std::map<recorder::Owner, std::uint64_t>& 
   return status;
 }
 
+plist::Dictionary unexportedStatus(const recorder::Unexported& unexported) {
+  plist::Dictionary status{{"count", unexported.count}};
+  if (unexported.count > 0) {
+    status.set("first", unexported.within.first);
+    status.set("last", unexported.within.last);
+  }
+  return status;
+}
+
 plist::Dictionary lossStatus() {
   using Loss = MemoryReserve::Loss;
   const MemoryReserve::Counts counts = MemoryReserve::counts();

@@ -15,6 +15,8 @@ namespace tarn::linux_host {
 // named.
 plist::Dictionary expiredStatus(const std::map<recorder::Owner, std::uint64_t>& expired,
                                 std::optional<std::uint32_t> onlyUser);
+// What of it hadn't left the device.
+plist::Dictionary unexportedStatus(const recorder::Unexported& unexported);
 // What was given up for want of memory.
 plist::Dictionary lossStatus();
 

@@ -27,6 +27,7 @@ if(TARN_EXPORT)
     "${TARN_SCRATCH}/tarnreporting-export.service" @ONLY)
   file(INSTALL "${TARN_SCRATCH}/tarnreporting-export.service" DESTINATION "${prefix}/${TARN_UNIT_DIR}")
   file(INSTALL "${TARN_PACKAGING}/export.toml" DESTINATION "${configuration}/tarnreporting")
+  file(INSTALL "${TARN_PACKAGING}/20-export.toml" DESTINATION "${configuration}/tarnreporting/tarnreportingd.toml.d")
 endif()
 if(TARN_COLLECT)
   configure_file("${TARN_PACKAGING}/systemd/tarnreporting-collect.service.in"

@@ -41,15 +41,18 @@ EventWriter::EventWriter(const RecorderOptions& options, platform::Log& log, con
       pace_(options.commitWindow, options.fewestWaiting),
       started_(clock.epochSeconds()) {
   file_.setLogLimit(logLimit(options));
+  file_.setExported(options.exported.value_or(""));
 }
 
 void EventWriter::setRetention(const RecorderOptions& options) {
   options_.maxMegabytes = options.maxMegabytes;
   options_.maxAgeDays = options.maxAgeDays;
   options_.summaryMaxAgeDays = options.summaryMaxAgeDays;
+  options_.exported = options.exported;
   usage_.setCap(capOf(options_));
   file_.setLimits(limitsOf(options_));
   file_.setLogLimit(logLimit(options_));
+  file_.setExported(options_.exported.value_or(""));
 }
 
 bool EventWriter::open() {
@@ -97,30 +100,6 @@ void EventWriter::close() noexcept {
   file_.close();
 }
 
-void EventWriter::tellWhatOpeningFound() {
-  const std::string path = file_.path().string();
-  for (const std::string& name : file_.takePutAside()) {
-    std::string line = "recorder file " + path;
-    line.append(" had something in its log's place that is no regular file; it is set aside as ").append(name);
-    log_.error(line);
-  }
-  if (const auto events = file_.takeMigrated()) {
-    log_.notice("recorder file " + path + " had the layout of an older service; its " + std::to_string(*events) +
-                " events have the present one now");
-  }
-  if (const std::int64_t last = file_.takeGoneUpTo(); last > 0) {
-    log_.error(LogCondition::StoreDamaged, "recorder file " + path + " holds nothing of the events up to " +
-                                               std::to_string(last) +
-                                               " that were committed: it is new, or its log is gone");
-  }
-  if (const auto missing = file_.takeMissing()) {
-    missing_ = missing;
-    log_.error(LogCondition::StoreDamaged, "recorder file " + path + " misses " + std::to_string(missing->count()) +
-                                               " committed events (" + textOf({*missing}) +
-                                               "): its log is damaged, cut or gone");
-  }
-}
-
 Status EventWriter::noteMissing() {
   Status error = file_.begin();
   if (error.ok()) {
@@ -149,20 +128,6 @@ void EventWriter::tidy() {
 
 void EventWriter::limitDatabase() {
   file_.setMaxBytes(usage_.databaseBytes(std::max(file_.logBytes(), logReserve(options_))));
-}
-
-void EventWriter::tellLongLog() {
-  const bool isLong = file_.logBytes() >= options_.longLogBytes;
-  if (isLong && !longLogTold_) {
-    std::string readers;
-    for (const std::string& reader : readersOf(file_.path())) {
-      readers += (readers.empty() ? "" : ", ") + reader;
-    }
-    log_.error("recorder file " + file_.path().string() + " has a log of " + std::to_string(file_.logBytes() >> 20U) +
-               " MiB, held up by readers of an old state: " +
-               (readers.empty() ? "none that can be seen" : "process " + readers));
-  }
-  longLogTold_ = isLong;
 }
 
 Status EventWriter::carryOver() {
@@ -279,6 +244,7 @@ bool EventWriter::settle() {
   if (!file_.isOpen()) return true;
   limitDatabase();
   tellLongLog();
+  tellUnexported();
   if (const auto error = file_.checkpointIfDue(); error.failed()) {
     static_cast<void>(resolve(*error));
     return false;
@@ -379,15 +345,6 @@ bool EventWriter::resolveDamage(const Error& error) {
                                               "); it is set aside as " + aside.value.filename().string() +
                                               " and a fresh one is begun");
   return true;
-}
-
-void EventWriter::noteFault(const std::string& problem) {
-  problem_ = problem;
-  if (faulty_) return;
-  faulty_ = true;
-  faultSince_ = clock_.monotonic();
-  log_.error(LogCondition::StoreUnwritable,
-             "recorder can't write to " + file_.path().string() + ": " + problem + "; events are kept until it can");
 }
 
 }  // namespace tarn::recorder

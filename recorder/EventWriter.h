@@ -89,6 +89,8 @@ class EventWriter {
   std::uint64_t expired() const noexcept { return file_.expired(); }
   // The same by whose they were. Threads: any.
   std::map<Owner, std::uint64_t> expiredByOwner() const { return file_.expiredByOwner(); }
+  // Of them, those that hadn't left the device. Threads: any.
+  Unexported unexported() const { return file_.unexported(); }
   // How fast it goes.
   const CommitPace& pace() const noexcept { return pace_; }
   const std::string& problem() const noexcept { return problem_; }
@@ -117,6 +119,8 @@ class EventWriter {
   // Once for each time that the log has become so long: a reader that holds on to an old state keeps it from beginning
   // anew.
   void tellLongLog();
+  // Events went that hadn't left the device: at once, and then now and then as long as it goes on.
+  void tellUnexported();
   // A fault begins: one line, until settle() tells its end.
   void noteFault(const std::string& problem);
   // The payload as JSON; two events in a row that share one form it once.
@@ -145,6 +149,8 @@ class EventWriter {
   std::string problem_;                  // of the last failure
   bool lacksMemory_ = false;
   bool longLogTold_ = false;
+  std::uint64_t unexportedTold_ = 0;
+  std::chrono::nanoseconds nextUnexported_{0};  // on the monotonic clock
   bool faulty_ = false;
   bool suspected_ = false;  // the file was found unusable once
 };

@@ -200,8 +200,12 @@ void Recorder::settle(Settlement settlement) noexcept {
     }
   }
   if (!answer(settling)) {
-    const MutexLock lock(mutex_);
-    settling_.splice(settling_.end(), settlement);  // the writer tries again
+    {
+      const MutexLock lock(mutex_);
+      settling_.splice(settling_.end(), settlement);
+      owesAnswer_ = true;
+    }
+    work_.notifyOne();  // the writer tries again
   }
 }
 

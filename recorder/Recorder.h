@@ -62,8 +62,7 @@ class Recorder {
 
   // Log and clock outlive it. Nothing is opened, and no thread made.
   Recorder(RecorderOptions options, platform::Log& log, const platform::Clock& clock);
-  // As shutdown().
-  ~Recorder();
+  ~Recorder();  // as shutdown()
   Recorder(const Recorder&) = delete;
   Recorder& operator=(const Recorder&) = delete;
 
@@ -104,8 +103,9 @@ class Recorder {
   void setRetention(const RecorderOptions& options);
   // All counters of one moment. Threads: any.
   RecorderCounters counters() const;
-  // Events removed by retention, by the uid of their session; see Retention for those of nobody. Threads: any.
+  // Events that retention removed, as EventWriter has them. Threads: any.
   std::map<Owner, std::uint64_t> expiredByOwner() const { return writer_.expiredByOwner(); }
+  Unexported unexported() const { return writer_.unexported(); }
   // Commits what was handed over before the call without waiting for company, blocking for at most `timeout`. Whether
   // all of it is committed; false when the time is up or when any event was given up. Threads: any but the writer's.
   [[nodiscard]] bool flush(std::chrono::milliseconds timeout);
@@ -211,8 +211,7 @@ class Recorder {
   ConditionVariable done_;                       // for those who wait for it
   EventBatch incoming_ TARN_GUARDED_BY(mutex_);  // since the group that is being written was taken
   TimePoint incomingSince_ TARN_GUARDED_BY(mutex_);
-  // As EventBatch counts them, of both batches.
-  std::size_t waitingBytes_ TARN_GUARDED_BY(mutex_) = 0;
+  std::size_t waitingBytes_ TARN_GUARDED_BY(mutex_) = 0;  // of both batches
   std::uint64_t handedOver_ TARN_GUARDED_BY(mutex_) = 0;
   std::uint64_t committed_ TARN_GUARDED_BY(mutex_) = 0;
   std::uint64_t failed_ TARN_GUARDED_BY(mutex_) = 0;
@@ -232,6 +231,7 @@ class Recorder {
   std::uint64_t awaited_ TARN_GUARDED_BY(mutex_) = 0;  // accepted before the last flush() or settle()
   std::optional<RecorderOptions> retention_ TARN_GUARDED_BY(mutex_);  // another one, until the writer has it
   Settlement settling_ TARN_GUARDED_BY(mutex_);
+  bool owesAnswer_ TARN_GUARDED_BY(mutex_) = false;  // for which memory was missing
   bool asleep_ TARN_GUARDED_BY(mutex_) = false;  // the writer waits for the first event of a group
   bool opened_ TARN_GUARDED_BY(mutex_) = false;
   bool stopping_ TARN_GUARDED_BY(mutex_) = false;

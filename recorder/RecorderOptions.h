@@ -9,6 +9,7 @@
 #include <cstdint>
 #include <filesystem>
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -38,6 +39,8 @@ struct RecorderOptions {
   // How old messages get, and what was made of them; that is no less.
   double maxAgeDays = 30;
   double summaryMaxAgeDays = 120;
+  // A file that says up to which id events have left the device: these go before the others. Nothing: none leaves.
+  std::optional<std::string> exported;
   // How often an idle recorder looks for events that have grown too old. Ages are days, so a minute is soon enough; a
   // busy one looks with each commit.
   std::chrono::milliseconds maintenanceInterval{60'000};

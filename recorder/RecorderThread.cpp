@@ -117,7 +117,7 @@ void Recorder::run() {
 void Recorder::waitForWork() {
   retry_ = options_.firstRetry;
   if (position_ < current_.size()) return;
-  while (incoming_.empty() && !stopping_ && !retention_) {
+  while (incoming_.empty() && !stopping_ && !retention_ && !owesAnswer_) {
     asleep_ = true;
     const bool due = !work_.waitUntil(mutex_, std::min(nextMaintenance_, nextVerification_));
     asleep_ = false;
@@ -279,6 +279,7 @@ void Recorder::account(std::size_t events, std::size_t notes, std::size_t bytes)
 // Called locked, and returns so; queues are called without the lock. False when memory is missing for an answer: it is
 // still owed.
 bool Recorder::answerSettled() {
+  owesAnswer_ = false;  // else it fails here too, and is tried again with the next retry
   while (!settling_.empty() && isCommitted(settling_.front()->target, settling_.front()->notes)) {
     const std::shared_ptr<Settling> settled = settling_.front();
     mutex_.unlock();

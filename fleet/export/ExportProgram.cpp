@@ -75,8 +75,9 @@ class Program {
         store_(options.stateDirectory + kStore),
         sieve_(configuration.rules, key),
         cursor_(options.ownDirectory + "/cursor"),
+        arrived_(options.ownDirectory + "/arrived"),
         window_(publisher, Backoff(std::random_device()()), limitsOf(configuration.server)),
-        exporter_(store_, sieve_, device, cursor_, window_, publisher) {}
+        exporter_(store_, sieve_, device, cursor_, arrived_, window_, publisher) {}
 
   int run() {
     const Result<std::string> begun = exporter_.begin();

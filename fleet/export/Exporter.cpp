@@ -29,6 +29,7 @@ Result<std::string> Exporter::begin() {
   Result<ReadCursor> read = cursorFile_.read();
   if (read.failed()) return {{}, std::move(read.error)};
   written_ = next_ = std::move(read.value.cursor);
+  if (Status told = arrivedFile_.write(written_.event); told.failed()) return {{}, std::move(told)};
   return {std::move(read.value.remark), {}};
 }
 
@@ -54,6 +55,7 @@ Status Exporter::settle(const ExportClock& now, std::chrono::milliseconds longes
     nextWrite_ = now.monotonic + kBetweenWrites;
     if (Status written = cursorFile_.write(*settled_); written.failed()) return written;
     written_ = *std::exchange(settled_, std::nullopt);
+    return arrivedFile_.write(written_.event);
   }
   return {};
 }

@@ -11,6 +11,7 @@
 #include <string>
 #include <vector>
 
+#include "fleet/cursor/ArrivedFile.h"
 #include "fleet/cursor/CursorFile.h"
 #include "fleet/export/BatchMaker.h"
 #include "fleet/format/Message.h"
@@ -26,12 +27,13 @@ struct ExportClock {
 
 class Exporter {
  public:
-  Exporter(StoreTail& store, PrivacySieve& sieve, const std::string& device, CursorFile& cursor, SendWindow& window,
-           Publisher& publisher)
+  Exporter(StoreTail& store, PrivacySieve& sieve, const std::string& device, CursorFile& cursor, ArrivedFile& arrived,
+           SendWindow& window, Publisher& publisher)
       : store_(store),
         sieve_(sieve),
         maker_(sieve, device),
         cursorFile_(cursor),
+        arrivedFile_(arrived),
         window_(window),
         publisher_(publisher) {}
 
@@ -63,6 +65,7 @@ class Exporter {
   PrivacySieve& sieve_;
   BatchMaker maker_;
   CursorFile& cursorFile_;
+  ArrivedFile& arrivedFile_;
   SendWindow& window_;
   Publisher& publisher_;
   MessagePacker packer_;

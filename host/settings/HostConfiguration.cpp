@@ -219,6 +219,8 @@ constexpr std::array kSettings{
         "recorder", "summary_max_age_days", kAtOnce,
         [](auto& host) -> auto& { return host.recorder.summaryMaxAgeDays; }, Days()),
     setting(
+        "recorder", "exported", kAtOnce, [](auto& host) -> auto& { return host.recorder.exported; }, TakeFile()),
+    setting(
         "recorder", "redundant", kAtRestart, [](auto& host) -> auto& { return host.recorder.redundant; }, Take()),
     setting(
         "recorder", "set_aside_max_age_days", kAtRestart,

@@ -142,11 +142,15 @@ class EventFile {
   std::uint64_t expired() const noexcept { return expired_; }
   // The same by whose they were. Threads: any.
   std::map<Owner, std::uint64_t> expiredByOwner() const { return retention_.expiredByOwner(); }
+  // Of them, those that hadn't left the device. Threads: any.
+  Unexported unexported() const { return retention_.unexported(); }
 
   // What the database may take, and how large its log grows before it is brought in while commits go on. At twice the
   // size they wait for it. Bytes; from the next expire() and checkpointIfDue() on.
   void setMaxBytes(std::int64_t maxBytes) noexcept { retention_.setMaxBytes(maxBytes); }
   void setLimits(const RetentionLimits& limits) noexcept { retention_.setLimits(limits); }
+  // Where is said what has left the device; empty: nowhere.
+  void setExported(const std::filesystem::path& file) { retention_.setExported(file); }
   void setLogLimit(std::int64_t bytes) noexcept { logLimit_ = bytes; }
   // Of the log after the last commit, in bytes; a reader that holds on to an old state keeps it from starting again,
   // and so it grows.

@@ -16,11 +16,10 @@ namespace {
 
 using SteadyClock = std::chrono::steady_clock;
 
-// Events in one step, groups that one looks at, and pages given back in one go: a few milliseconds each.
+// Events in one step, and groups that one looks at: a few milliseconds.
 constexpr std::int64_t kSliceEvents = 512;
 constexpr int kSliceGroups = 512;
 constexpr std::int64_t kSliceRepeats = 1024;
-constexpr std::int64_t kPagesAtOnce = 64;
 // For space so many bytes at least go in one step, as each has to look around.
 constexpr std::int64_t kLeastSliceBytes = std::int64_t{1} << 15;
 constexpr std::int64_t kSliceShare = 512;
@@ -39,6 +38,14 @@ constexpr std::int64_t kFirstId = std::numeric_limits<std::int64_t>::min();
 
 constexpr std::size_t indexOf(EventSort sort) noexcept {
   return static_cast<std::size_t>(sort);
+}
+
+void addTo(Unexported& sum, const Unexported& more) noexcept {
+  if (more.count == 0) return;
+  sum.within = sum.count == 0 ? more.within
+                              : IdRange{std::min(sum.within.first, more.within.first),
+                                        std::max(sum.within.last, more.within.last)};
+  sum.count += more.count;
 }
 
 }  // namespace
@@ -68,8 +75,6 @@ int Retention::prepare(Connection& connection) {
       {removeRepeats_,
        "DELETE FROM redundant_messages WHERE id IN (SELECT id FROM redundant_messages ORDER BY id LIMIT ?2) AND "
        "after_event < ?1"},
-      {pageCount_, "PRAGMA page_count"},
-      {freePages_, "PRAGMA freelist_count"},
       {groupTimes_,
        "SELECT first, seconds FROM event_groups WHERE first >= coalesce((SELECT max(first) FROM event_groups WHERE "
        "first <= ?1), ?1) ORDER BY first"},
@@ -79,19 +84,20 @@ int Retention::prepare(Connection& connection) {
   }
   int code = scan_.prepare(connection);
   code = code == SQLITE_OK ? removal_.prepare(connection) : code;
-  pageBytes_ = connection.integer("PRAGMA page_size").value_or(4096);
+  code = code == SQLITE_OK ? pages_.prepare(connection) : code;
   forgetShares();
   rolledBack();
   return code;
 }
 
 void Retention::finalize() noexcept {
-  for (Statement* const statement : {&oldest_, &oldestRepeat_, &keepLastRepeat_, &removeRepeatSums_, &removeRepeats_,
-                                     &pageCount_, &freePages_, &groupTimes_}) {
+  for (Statement* const statement :
+       {&oldest_, &oldestRepeat_, &keepLastRepeat_, &removeRepeatSums_, &removeRepeats_, &groupTimes_}) {
     statement->finalize();
   }
   scan_.finalize();
   removal_.finalize();
+  pages_.finalize();
   forgetShares();
 }
 
@@ -105,6 +111,7 @@ void Retention::committed() noexcept {
   countCommitted_ = count_;
   if (expiring_.empty()) return;
   const MutexLock lock(mutex_);
+  addTo(unexported_, std::exchange(leaving_, {}));
   for (const auto& [owner, events] : expiring_) {
     expired_.find(owner)->second += events;
   }
@@ -121,6 +128,7 @@ void Retention::rolledBack() {
   scan_.forget();
   agedFrom_ = {kFirstId, kFirstId};
   expiring_.clear();
+  leaving_ = {};
 }
 
 std::map<Owner, std::uint64_t> Retention::expiredByOwner() const {
@@ -132,6 +140,11 @@ std::map<Owner, std::uint64_t> Retention::expiredByOwner() const {
     }
   }
   return expired;
+}
+
+Unexported Retention::unexported() const {
+  const MutexLock lock(mutex_);
+  return unexported_;
 }
 
 int Retention::readOldest(std::int64_t& id) {
@@ -238,6 +251,18 @@ void Retention::notePicked(const ScannedEvent& event) {
     expired_.try_emplace(owner, 0);
   }
   ++expiring_[owner];
+  if (exportedUpTo_ && event.id > *exportedUpTo_) {
+    addTo(leaving_, {1, {event.id, event.id}});
+  }
+}
+
+Shares::Next Retention::nextForSpace() {
+  if (hasExported_) {
+    if (const auto next = shares_.nextUpTo(*exportedUpTo_)) return *next;
+    hasExported_ = false;
+  }
+  const Owner owner = shares_.largest();
+  return {owner, shares_.nextSort(owner)};
 }
 
 int Retention::readNext(Line& line, std::int64_t newest) {
@@ -263,10 +288,9 @@ int Retention::pickForSpace(std::int64_t newest, std::int64_t excess) {
       std::min(shares_.bytes() / 2, std::max({kLeastSliceBytes, limits_.maxBytes / kSliceShare, excess}));
   std::map<std::pair<Owner, EventSort>, Line> lines;
   int code = SQLITE_OK;
-  for (std::int64_t events = 0, bytes = 0; events < mostEvents && (events == 0 || bytes < mostBytes); ++events) {
+  for (std::int64_t events = 0, bytes = 0; events < mostEvents && (events == 0 || bytes < mostBytes);) {
     if (shares_.empty()) break;
-    const Owner owner = shares_.largest();
-    const EventSort sort = shares_.nextSort(owner);
+    const auto [owner, sort] = nextForSpace();
     const auto [place, isNew] = lines.try_emplace({owner, sort}, Line{owner, sort, 0, {}});
     Line& line = place->second;
     if (isNew) {
@@ -277,7 +301,13 @@ int Retention::pickForSpace(std::int64_t newest, std::int64_t excess) {
       forgetShares();
       return SQLITE_OK;
     }
-    const ScannedEvent& event = line.events[line.at++];
+    const ScannedEvent& event = line.events[line.at];
+    if (hasExported_ && event.id > *exportedUpTo_) {
+      shares_.passed(owner, sort, event.id);  // the owner's next one hasn't left, so it is not its turn yet
+      continue;
+    }
+    ++line.at;
+    ++events;
     notePicked(event);
     shares_.remove(owner, sort, event.bytes);
     bytes += event.bytes;
@@ -297,27 +327,6 @@ int Retention::removePicked(std::uint64_t& removed) {
   return code;
 }
 
-int Retention::readPragma(Statement& pragma, std::int64_t& value) {
-  const int code = pragma.step();
-  if (code == SQLITE_ROW) {
-    value = pragma.integer(0);
-  }
-  pragma.reset();
-  return code == SQLITE_ROW ? SQLITE_OK : code;
-}
-
-int Retention::readSizes(std::int64_t& fileBytes, std::int64_t& usedBytes) {
-  std::int64_t pages = 0;
-  std::int64_t freePages = 0;
-  int code = readPragma(pageCount_, pages);
-  if (code == SQLITE_OK) {
-    code = readPragma(freePages_, freePages);
-  }
-  fileBytes = pages * pageBytes_;
-  usedBytes = (pages - freePages) * pageBytes_;
-  return code;
-}
-
 int Retention::removeSlice(double now, std::int64_t newest, Deadline deadline, bool& more, std::uint64_t& removed) {
   more = false;
   picked_.clear();
@@ -327,17 +336,16 @@ int Retention::removeSlice(double now, std::int64_t newest, Deadline deadline, b
   }
   if (code != SQLITE_OK || more) return code == SQLITE_OK ? removePicked(removed) : code;
 
-  std::int64_t fileBytes = 0;
-  std::int64_t usedBytes = 0;
+  PageSpace::Bytes space;
   std::int64_t oldest = kFirstId;
-  code = readSizes(fileBytes, usedBytes);
+  code = pages_.read(space);
   code = code == SQLITE_OK ? readOldest(oldest) : code;
-  const std::int64_t excess = usedBytes - (limits_.maxBytes - limits_.maxBytes / kReserveShare);
+  const std::int64_t excess = space.used - (limits_.maxBytes - limits_.maxBytes / kReserveShare);
   if (code == SQLITE_OK) {
     code = removeRepeats(excess > 0 ? newest + 1 : std::max(oldest, agedFrom_[indexOf(EventSort::Message)]), more);
   }
   if (code != SQLITE_OK || more) return code;
-  const bool isNear = usedBytes / kCountingFrom >= limits_.maxBytes / kOfQuarters;
+  const bool isNear = space.used / kCountingFrom >= limits_.maxBytes / kOfQuarters;
   if (code == SQLITE_OK && count_ != Count::Done && (isNear || excess > 0)) {
     code = goOnCounting(newest, excess > 0 ? Deadline::max() : deadline);
     more = count_ != Count::Done;
@@ -349,32 +357,16 @@ int Retention::removeSlice(double now, std::int64_t newest, Deadline deadline, b
   return code == SQLITE_OK ? removePicked(removed) : code;
 }
 
-int Retention::giveBackPages(bool& gaveAny) {
-  std::int64_t fileBytes = 0;
-  std::int64_t usedBytes = 0;
-  gaveAny = false;
-  const int code = readSizes(fileBytes, usedBytes);
-  if (code != SQLITE_OK || fileBytes <= limits_.maxBytes || fileBytes == usedBytes) return code;
-  const std::int64_t excess =
-      (std::min(fileBytes - limits_.maxBytes, fileBytes - usedBytes) + pageBytes_ - 1) / pageBytes_;
-  const std::string pragma = "PRAGMA incremental_vacuum(" + std::to_string(std::min(excess, kPagesAtOnce)) + ")";
-  const int vacuumed = connection_->run(pragma.c_str());
-  if (vacuumed != SQLITE_OK) return vacuumed;
-  std::int64_t left = 0;
-  const int read = readSizes(left, usedBytes);
-  // A file that was made without the page map can't shrink; its free pages are used again all the same.
-  gaveAny = left < fileBytes;
-  return read;
-}
-
 int Retention::expire(double now, std::int64_t newest, Deadline deadline, std::uint64_t& removed) {
   bool more = true;
   int code = SQLITE_OK;
   removedUpTo_ = 0;
+  exportedUpTo_ = exported_.upTo(SteadyClock::now());
+  hasExported_ = exportedUpTo_.has_value();
   do {
     code = removeSlice(now, newest, deadline, more, removed);
     if (code == SQLITE_OK && !more) {
-      code = giveBackPages(more);
+      code = pages_.giveBack(limits_.maxBytes, more);
     }
   } while (code == SQLITE_OK && more && SteadyClock::now() < deadline);
   hasMore_ = code == SQLITE_OK && more;

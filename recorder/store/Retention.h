@@ -13,22 +13,31 @@
 // The rows of repeated messages say least: for space all of them go before an event does, the oldest first, else as
 // those of messages do.
 //
+// What has left the device already goes before anything that hasn't: that is here alone (see ExportedIds). What goes
+// all the same, for space or for its age, is counted.
+//
 // Too old: messages and summaries each have an age. An event's is that of its group, on the recorder's own time and not
 // by the event's; what was recorded before there were groups is as old as the first group.
 //
-// Owner: the event file; all calls stand inside its transactions. Threads: the writer's, but for expiredByOwner().
+// Owner: the event file; all calls stand inside its transactions. Threads: the writer's, but for expiredByOwner() and
+// unexported().
 #pragma once
 
 #include <array>
 #include <chrono>
 #include <cstdint>
+#include <filesystem>
 #include <map>
+#include <optional>
 #include <vector>
 
 #include "plist/ThreadSafety.h"
 #include "recorder/store/retention/EventOwner.h"
 #include "recorder/store/retention/EventRemoval.h"
 #include "recorder/store/retention/EventScan.h"
+#include "recorder/store/retention/ExportedIds.h"
+#include "recorder/store/retention/IdRange.h"
+#include "recorder/store/retention/PageSpace.h"
 #include "recorder/store/retention/Shares.h"
 #include "recorder/store/rows/Connection.h"
 #include "recorder/store/rows/Statement.h"
@@ -41,6 +50,13 @@ struct RetentionLimits {
   std::int64_t maxBytes;
   double maxAgeSeconds;
   double summaryMaxAgeSeconds;
+};
+
+// Events that went without having left the device, and the ids between which they lie.
+struct Unexported {
+  std::uint64_t count = 0;
+  IdRange within;
+  friend bool operator==(const Unexported&, const Unexported&) = default;
 };
 
 class Retention {
@@ -57,6 +73,8 @@ class Retention {
   void setMaxBytes(std::int64_t maxBytes) noexcept { limits_.maxBytes = maxBytes; }
   // Other limits, likewise.
   void setLimits(const RetentionLimits& limits) noexcept { limits_ = limits; }
+  // Where whoever carries events away says how far that is; empty: nobody does.
+  void setExported(const std::filesystem::path& file) { exported_.setFile(file); }
   // For sessions whose events are gone: how old their rows get, and how many there may be, so that they take a
   // thirtieth of the limit or so.
   double maxAgeSeconds() const noexcept { return limits_.maxAgeSeconds; }
@@ -86,6 +104,8 @@ class Retention {
   std::int64_t removedUpTo() const noexcept { return removedUpTo_; }
   // How many events of each were removed by the transactions committed so far, since this was made. Threads: any.
   std::map<Owner, std::uint64_t> expiredByOwner() const;
+  // Of them, those that hadn't left the device; none where nobody carries any away. Threads: any.
+  Unexported unexported() const;
 
  private:
   static constexpr std::int64_t kBytesASession = 8192;
@@ -103,6 +123,8 @@ class Retention {
   [[nodiscard]] int readAgedBefore(double cutoff, std::int64_t from, std::int64_t newest, std::int64_t& before);
   // Picks for space, of which the database has so many bytes too few.
   [[nodiscard]] int pickForSpace(std::int64_t newest, std::int64_t excess);
+  // Whose event goes next for space: of what has left the device, and of the rest when there is none of that.
+  [[nodiscard]] Shares::Next nextForSpace();
   [[nodiscard]] int readNext(Line& line, std::int64_t newest);
   [[nodiscard]] int goOnCounting(std::int64_t newest, Deadline deadline);
   // Removes what was picked.
@@ -112,11 +134,6 @@ class Retention {
   [[nodiscard]] int readOldest(std::int64_t& id);
   // Rows of repeated messages that came before this event, the oldest first, so many as one step takes.
   [[nodiscard]] int removeRepeats(std::int64_t before, bool& removedAny);
-  [[nodiscard]] int readPragma(Statement& pragma, std::int64_t& value);
-  // Of the file, and of its pages in use.
-  [[nodiscard]] int readSizes(std::int64_t& fileBytes, std::int64_t& usedBytes);
-  // 64 pages at the most, and only where the file is over its limit.
-  [[nodiscard]] int giveBackPages(bool& gaveAny);
 
   RetentionLimits limits_;
   // Between prepare() and finalize().
@@ -127,12 +144,15 @@ class Retention {
   Statement keepLastRepeat_;
   Statement removeRepeatSums_;
   Statement removeRepeats_;
-  Statement pageCount_;
-  Statement freePages_;
   Statement groupTimes_;
   EventScan scan_;
   EventRemoval removal_;
+  PageSpace pages_;
   Shares shares_;
+  ExportedIds exported_;
+  // In this expire(): what has left the device, and whether any of that is here still, as far as is known.
+  std::optional<std::int64_t> exportedUpTo_;
+  bool hasExported_ = false;
   Count count_ = Count::None;
   Count countCommitted_ = Count::None;  // as the last commit left it
   // While they are counted: where that goes on, and what came after it had begun and is counted as it comes.
@@ -143,11 +163,11 @@ class Retention {
   std::vector<std::int64_t> picked_;
   std::vector<ScannedEvent> scanned_;        // kept for its room
   std::map<Owner, std::uint64_t> expiring_;  // in this transaction
+  Unexported leaving_;                       // likewise
   mutable Mutex mutex_;
+  Unexported unexported_ TARN_GUARDED_BY(mutex_);
   // Has everybody whom expiring_ has, so that a commit needs no memory.
   std::map<Owner, std::uint64_t> expired_ TARN_GUARDED_BY(mutex_);
-  // Of a page of the database, as prepare() found it.
-  std::int64_t pageBytes_ = 0;
   std::int64_t removedUpTo_ = 0;
   bool hasMore_ = false;
 };

@@ -3,6 +3,8 @@
 
 #include <gtest/gtest.h>
 
+#include <fstream>
+#include <iterator>
 #include <memory>
 #include <random>
 #include <set>
@@ -58,8 +60,9 @@ class FleetExporter : public testing::SessionStoreFixture {
         : store(file),
           sieve(rules(), FleetKey::parse(std::string(64, '7')).value),
           cursor((directory / "cursor").string()),
+          arrived((directory / "arrived").string()),
           window(publisher, Backoff(seed), {4, 1 << 20, 10s}),
-          exporter(store, sieve, std::string(kDeviceBytes, 'd'), cursor, window, publisher) {
+          exporter(store, sieve, std::string(kDeviceBytes, 'd'), cursor, arrived, window, publisher) {
       const auto begun = exporter.begin();
       EXPECT_TRUE(begun.ok()) << begun.error.text();
       remark = begun.value;
@@ -74,6 +77,7 @@ class FleetExporter : public testing::SessionStoreFixture {
     StoreTail store;
     PrivacySieve sieve;
     CursorFile cursor;
+    ArrivedFile arrived;
     SendWindow window;
     Exporter exporter;
     std::string remark;
@@ -97,6 +101,12 @@ class FleetExporter : public testing::SessionStoreFixture {
       addEvent(session, 1795158000, "tally", "sys.oxbow.tarnkit.Volume.Summary", R"({"a":1})");
     }
     sql("COMMIT");
+  }
+
+  // What the recorder is told.
+  std::string told() const {
+    std::ifstream file(directory() / "arrived");
+    return {std::istreambuf_iterator<char>(file), std::istreambuf_iterator<char>()};
   }
 
   FakePublisher publisher_;
@@ -130,6 +140,25 @@ TEST_F(FleetExporter, GoesOnWhereItWasAfterARestart) {
   EXPECT_EQ(publisher_.messages().size(), before + 1);
   EXPECT_EQ(arrivedAt(publisher_).events.size(), 5010U);
   EXPECT_EQ(arrivedAt(publisher_).repeated, 0);
+}
+
+TEST_F(FleetExporter, TheRecorderIsToldWhatHasArrivedAndThatSomebodyCarriesAway) {
+  makeStore();
+  addSession({});
+  addEvents(100);
+  publisher_.losesAnswers = 1;
+  begin();
+  EXPECT_EQ(told(), "0\n") << "before anything is read";
+  step();
+  EXPECT_EQ(told(), "0\n") << "sent, and not acknowledged";
+  publisher_.losesAnswers = 0;
+  runToTheEnd();
+  EXPECT_EQ(told(), "100\n");
+  addEvents(11);
+  begin();
+  EXPECT_EQ(told(), "100\n");
+  runToTheEnd();
+  EXPECT_EQ(told(), "111\n");
 }
 
 TEST_F(FleetExporter, TheCursorStaysWhileNothingIsAcknowledged) {

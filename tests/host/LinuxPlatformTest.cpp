@@ -208,6 +208,7 @@ TEST_F(LinuxPlatformTest, StatusTellsSessionsQueuedWorkAndTheRecordersCounters) 
   EXPECT_EQ(status->get("recorder_committed"), plist::ValueView(0));
   EXPECT_EQ(status->get("recorder_expired"), plist::ValueView(0));
   EXPECT_TRUE(status->get("recorder_expired_by_user").dictionary().empty());
+  EXPECT_EQ(status->get("recorder_expired_unexported").dictionary(), (plist::Dictionary{{"count", 0}}));
   EXPECT_EQ(status->get("recorder_failed"), plist::ValueView(0));
   EXPECT_EQ(status->get("connections_open"), plist::ValueView(1));
   letGo_.set_value();

@@ -37,6 +37,7 @@ SERVICE, SOCKET = "tarnreportingd.service", "tarnreportingd.socket"
 # What a program of the story reports a second.
 RATE = 5000
 # How often the service is restarted or killed beside one program, whose messages are looked at then.
+ROOM = 16384  # megabytes
 ENDS_A_PROGRAM = 25
 SCRIPT = os.path.join(ROOT, "debian", "tests", "script.jsonl")
 # What is run inside.
@@ -163,6 +164,7 @@ class FreshMachine(unittest.TestCase):
               f"recorded, {lost} lost, {stored['rows'] - stored['different']} doubled, {stored['periods']} periods so "
               f"far, {len(stored['odd'])} odd", flush=True)
         self.assertEqual(stored["odd"], [])
+        self.assertFalse(stored["removed"], "the cap is reached: this would not tell a loss")
         self.assertEqual(stored["rows"], stored["different"])
         self.assertGreaterEqual(lost, 0)
         self.assertLessEqual(lost, program["posted"] if killed else 0)
@@ -240,6 +242,11 @@ class FreshMachine(unittest.TestCase):
             self.assertIn("enabled", self.does("systemctl", "--global", "is-enabled", adapter + ".service"))
 
     def test_07_settings_are_read_anew_and_broken_ones_leave_the_old_ones(self):
+        # A thousand reloads or restarts leave more than the cap that is there by default.
+        self.does("sh", "-c", "mkdir -p /etc/tarnreporting/tarnreportingd.toml.d && "
+                  f"printf '[recorder]\\nmax_megabytes = {ROOM}\\n' "
+                  "> /etc/tarnreporting/tarnreportingd.toml.d/70-room.toml")
+        self.does("systemctl", "reload-or-restart", SERVICE)
         told, _ = self.reported(lambda: self.tells("reloads", options.reloads, patience=600))
         print(f"    {told['good']} good, {told['broken']} broken reloads", flush=True)
         self.assertEqual(told["wrong"], [])

@@ -1,4 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
+#include <fstream>
+
 #include "tests/recorder/RecorderFixture.h"
 
 namespace tarn::recorder {
@@ -35,6 +37,48 @@ TEST_F(RecorderRetention, WriteAheadLogStaysBounded) {
     largest = std::max(largest, std::filesystem::file_size(file().string() + "-wal"));
   }
   EXPECT_LE(largest, 24 * kMegabyte);
+}
+
+TEST_F(RecorderRetention, WhatGoesWithoutHavingLeftIsToldOnceAMinute) {
+  options_.maxMegabytes = 1;
+  options_.exported = (directory_.path() / "arrived").string();
+  std::ofstream(*options_.exported) << "0\n";
+  start();
+  const auto lines = [&] {
+    std::size_t count = 0;
+    for (const auto& entry : log_.entries(platform::LogLevel::Error)) {
+      count += entry.text.find("events that hadn't been exported") != std::string::npos ? 1U : 0U;
+    }
+    return count;
+  };
+  for (int round = 0; round < 10; ++round) {
+    recordMany(500, 1000);
+    ASSERT_TRUE(flush());
+  }
+  EXPECT_TRUE(eventually([&] { return lines() == 1; }));
+  const Unexported unexported = recorder_->unexported();
+  EXPECT_EQ(unexported.count, recorder_->counters().expired);
+  EXPECT_EQ(unexported.within, (IdRange{1, static_cast<std::int64_t>(unexported.count)}));
+  clock_.advance(options_.maintenanceInterval);
+  recordMany(500, 1000);
+  ASSERT_TRUE(flush());
+  EXPECT_TRUE(eventually([&] { return lines() == 2; }));
+}
+
+TEST_F(RecorderRetention, AnotherFileThatSaysWhatHasLeftCountsFromSoonOn) {
+  options_.maxMegabytes = 1;
+  start();
+  recordMany(2000, 1000);
+  ASSERT_TRUE(flush());
+  EXPECT_EQ(recorder_->unexported(), Unexported());
+  RecorderOptions other = options_;
+  other.exported = (directory_.path() / "arrived").string();
+  std::ofstream(*other.exported) << "0\n";
+  recorder_->setRetention(other);
+  EXPECT_TRUE(eventually([&] {
+    recordMany(100, 1000);
+    return flush() && recorder_->unexported().count > 0;
+  }));
 }
 
 TEST_F(RecorderRetention, TheOldestGoFirstAndAreCounted) {

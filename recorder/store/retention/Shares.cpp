@@ -64,6 +64,16 @@ EventSort Shares::nextSort(Owner owner) const {
   return of(owner).events[indexOf(EventSort::Message)] > 0 ? EventSort::Message : EventSort::Summary;
 }
 
+std::optional<Shares::Next> Shares::nextUpTo(std::int64_t last) const {
+  for (const auto& [bytes, owner] : order_) {
+    const Account& account = accounts_.at(owner);
+    for (const EventSort sort : {EventSort::Message, EventSort::Summary}) {
+      if (account.events[indexOf(sort)] > 0 && account.from[indexOf(sort)] <= last) return Next{owner, sort};
+    }
+  }
+  return std::nullopt;
+}
+
 Shares::Account Shares::of(Owner owner) const {
   const auto found = accounts_.find(owner);
   return found == accounts_.end() ? Account() : found->second;

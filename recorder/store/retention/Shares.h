@@ -42,6 +42,13 @@ class Shares {
   // Whose events go next, and of which sort; not when it is empty.
   Owner largest() const noexcept { return order_.begin()->second; }
   EventSort nextSort(Owner owner) const;
+  // Of whom something goes next when only what has no greater id than `last` may go: of those who may have such, who
+  // has most. Nothing when nobody has.
+  struct Next {
+    Owner owner;
+    EventSort sort;
+  };
+  std::optional<Next> nextUpTo(std::int64_t last) const;
   // All zero for somebody without events.
   Account of(Owner owner) const;
   std::int64_t events() const noexcept { return events_; }

@@ -56,6 +56,7 @@ max_megabytes = 1
 max_age_days = 7
 summary_max_age_days = 14
 redundant = "mark"
+exported = "/var/lib/exporter/arrived"
 set_aside_max_age_days = 15
 summary_file_max_age_days = 16
 trace_max_age_days = 17
@@ -79,6 +80,7 @@ max_frame_bytes = 65536
   EXPECT_EQ(host.paths.traceAnalysis, "/opt/analysis.so");
   EXPECT_EQ(host.recorder.maxMegabytes, 1);
   EXPECT_EQ(host.recorder.redundant, recorder::Redundant::Mark);
+  EXPECT_EQ(host.recorder.exported, "/var/lib/exporter/arrived");
   EXPECT_EQ(host.recorder.maxAgeDays, 7);
   EXPECT_EQ(host.recorder.summaryMaxAgeDays, 14);
   EXPECT_EQ(host.recorder.fileMaxAges, (recorder::FileMaxAges{15, 16, 17, 18}));
