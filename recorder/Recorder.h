@@ -232,7 +232,7 @@ class Recorder {
   std::optional<RecorderOptions> retention_ TARN_GUARDED_BY(mutex_);  // another one, until the writer has it
   Settlement settling_ TARN_GUARDED_BY(mutex_);
   bool owesAnswer_ TARN_GUARDED_BY(mutex_) = false;  // for which memory was missing
-  bool asleep_ TARN_GUARDED_BY(mutex_) = false;  // the writer waits for the first event of a group
+  bool asleep_ TARN_GUARDED_BY(mutex_) = false;      // the writer waits for the first event of a group
   bool opened_ TARN_GUARDED_BY(mutex_) = false;
   bool stopping_ TARN_GUARDED_BY(mutex_) = false;
   bool refusing_ TARN_GUARDED_BY(mutex_) = false;

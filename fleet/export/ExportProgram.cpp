@@ -120,6 +120,7 @@ class Program {
   StoreTail store_;
   PrivacySieve sieve_;
   CursorFile cursor_;
+  ArrivedFile arrived_;
   SendWindow window_;
   Exporter exporter_;
   linux_host::ServiceManager manager_;

@@ -150,7 +150,7 @@ class EventFile {
   void setMaxBytes(std::int64_t maxBytes) noexcept { retention_.setMaxBytes(maxBytes); }
   void setLimits(const RetentionLimits& limits) noexcept { retention_.setLimits(limits); }
   // Where is said what has left the device; empty: nowhere.
-  void setExported(const std::filesystem::path& file) { retention_.setExported(file); }
+  void setExported(std::filesystem::path file) noexcept { retention_.setExported(std::move(file)); }
   void setLogLimit(std::int64_t bytes) noexcept { logLimit_ = bytes; }
   // Of the log after the last commit, in bytes; a reader that holds on to an old state keeps it from starting again,
   // and so it grows.

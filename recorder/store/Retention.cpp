@@ -241,6 +241,7 @@ int Retention::pickAged(EventSort sort, double cutoff, std::int64_t newest, bool
 }
 
 void Retention::notePicked(const ScannedEvent& event) {
+  lookAtExported();
   picked_.push_back(event.id);
   Owner owner = event.owner;
   {
@@ -254,6 +255,12 @@ void Retention::notePicked(const ScannedEvent& event) {
   if (exportedUpTo_ && event.id > *exportedUpTo_) {
     addTo(leaving_, {1, {event.id, event.id}});
   }
+}
+
+void Retention::lookAtExported() {
+  if (std::exchange(knowsExported_, true)) return;
+  exportedUpTo_ = exported_.read();
+  hasExported_ = exportedUpTo_.has_value();
 }
 
 Shares::Next Retention::nextForSpace() {
@@ -287,6 +294,7 @@ int Retention::pickForSpace(std::int64_t newest, std::int64_t excess) {
   const std::int64_t mostBytes =
       std::min(shares_.bytes() / 2, std::max({kLeastSliceBytes, limits_.maxBytes / kSliceShare, excess}));
   std::map<std::pair<Owner, EventSort>, Line> lines;
+  lookAtExported();
   int code = SQLITE_OK;
   for (std::int64_t events = 0, bytes = 0; events < mostEvents && (events == 0 || bytes < mostBytes);) {
     if (shares_.empty()) break;
@@ -361,8 +369,7 @@ int Retention::expire(double now, std::int64_t newest, Deadline deadline, std::u
   bool more = true;
   int code = SQLITE_OK;
   removedUpTo_ = 0;
-  exportedUpTo_ = exported_.upTo(SteadyClock::now());
-  hasExported_ = exportedUpTo_.has_value();
+  knowsExported_ = false;
   do {
     code = removeSlice(now, newest, deadline, more, removed);
     if (code == SQLITE_OK && !more) {

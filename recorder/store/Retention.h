@@ -29,6 +29,7 @@
 #include <filesystem>
 #include <map>
 #include <optional>
+#include <utility>
 #include <vector>
 
 #include "plist/ThreadSafety.h"
@@ -74,7 +75,7 @@ class Retention {
   // Other limits, likewise.
   void setLimits(const RetentionLimits& limits) noexcept { limits_ = limits; }
   // Where whoever carries events away says how far that is; empty: nobody does.
-  void setExported(const std::filesystem::path& file) { exported_.setFile(file); }
+  void setExported(std::filesystem::path file) noexcept { exported_.setFile(std::move(file)); }
   // For sessions whose events are gone: how old their rows get, and how many there may be, so that they take a
   // thirtieth of the limit or so.
   double maxAgeSeconds() const noexcept { return limits_.maxAgeSeconds; }
@@ -123,6 +124,7 @@ class Retention {
   [[nodiscard]] int readAgedBefore(double cutoff, std::int64_t from, std::int64_t newest, std::int64_t& before);
   // Picks for space, of which the database has so many bytes too few.
   [[nodiscard]] int pickForSpace(std::int64_t newest, std::int64_t excess);
+  void lookAtExported();
   // Whose event goes next for space: of what has left the device, and of the rest when there is none of that.
   [[nodiscard]] Shares::Next nextForSpace();
   [[nodiscard]] int readNext(Line& line, std::int64_t newest);
@@ -150,9 +152,10 @@ class Retention {
   PageSpace pages_;
   Shares shares_;
   ExportedIds exported_;
-  // In this expire(): what has left the device, and whether any of that is here still, as far as is known.
-  std::optional<std::int64_t> exportedUpTo_;
+  // In this expire(), once anything goes: what has left the device, and whether any of that may be here still.
+  bool knowsExported_ = false;
   bool hasExported_ = false;
+  std::optional<std::int64_t> exportedUpTo_;
   Count count_ = Count::None;
   Count countCommitted_ = Count::None;  // as the last commit left it
   // While they are counted: where that goes on, and what came after it had begun and is counted as it comes.

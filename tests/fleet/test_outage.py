@@ -8,6 +8,7 @@ import shutil
 import sqlite3
 import sys
 import tempfile
+import time
 import unittest
 
 HERE = os.path.dirname(os.path.abspath(__file__))
@@ -36,6 +37,8 @@ class ServedDevice(Device):
         self.client, self.sent = None, 0
 
     def close(self):
+        if self.client is not None:
+            self.client.close()
         self.service.kill()
         super().close()
 
@@ -44,6 +47,8 @@ class ServedDevice(Device):
                    f"others = [\"*\"]\n[server]\n{server}\n")
 
     def connect(self):
+        if self.client is not None:
+            self.client.close()
         self.client = self.service.connect()
         self.client.call(wire.CREATE, REPORTER)
         self.client.send(wire.START, REPORTER)
@@ -61,7 +66,13 @@ class ServedDevice(Device):
             return {row[0] for row in store.execute("SELECT id FROM event_rows")}
 
     def ledger(self):
-        return self.client.call(wire.STATUS)
+        """The status once retention is done with what there is."""
+        while True:
+            before = self.client.call(wire.STATUS)["recorder_expired"]
+            time.sleep(0.2)
+            status = self.client.call(wire.STATUS)
+            if status["recorder_expired"] == before:
+                return status
 
 
 @unittest.skipUnless(nats.PROGRAM, "nats-server is not installed here")
@@ -101,30 +112,36 @@ class Outage(unittest.TestCase):
     def test_what_goes_in_an_outage_longer_than_the_cap_is_what_the_gaps_say(self):
         self.bring_up()
         self.device.start()
-        self.device.send(200)
-        self.assertTrue(self.all_has_left(), self.device.logged())
+        for _ in range(8):
+            self.device.send(25)
+            self.assertTrue(self.all_has_left(), self.device.logged())
         left = self.device.cursor()
         self.server.end()
 
-        self.device.send(150)
+        self.device.send(60)
         self.assertGreater(self.device.ledger()["recorder_expired"], 0)
         self.assertEqual(self.device.ledger()["recorder_expired_unexported"], {"count": 0})
         self.assertLessEqual(set(range(left + 1, max(self.device.ids()) + 1)), self.device.ids())
 
         self.device.send(1500)
+        counted = self.device.ledger()["recorder_expired_unexported"]
         kept = self.device.ids()
         gone = set(range(left + 1, max(kept) + 1)) - kept
-        self.assertEqual(self.device.ledger()["recorder_expired_unexported"],
-                         {"count": len(gone), "first": min(gone), "last": max(gone)})
+        self.assertEqual(counted, {"count": len(gone), "first": min(gone), "last": max(gone)})
         self.assertIn(" events that hadn't been exported: ", self.device.service.log_text())
 
+        # What it had read before it went would leave still; one that is killed knows the store alone.
+        for process in self.device.processes:
+            process.kill()
+            process.wait()
+        self.device.start()
         self.server.start()
         self.assertTrue(self.all_has_left(), self.device.logged())
         events, gaps = self.told_of()
         self.assertEqual(gaps, gone)
         self.assertEqual(events | gaps, set(range(1, max(kept) + 1)))
         self.assertEqual(events & gaps, set())
-        self.assertEqual(events, set(range(1, left + 1)) | kept)
+        self.assertEqual(events, set(range(1, left + 1)) | {each for each in kept if each > left})
 
     def test_a_service_that_is_killed_in_the_outage_changes_nothing(self):
         self.bring_up()
@@ -132,13 +149,12 @@ class Outage(unittest.TestCase):
         self.device.send(50)
         self.assertTrue(self.all_has_left(), self.device.logged())
         self.server.end()
-        removed = 0
         for _ in range(3):
             self.device.send(500)
-            removed += self.device.ledger()["recorder_expired_unexported"]["count"]
             self.device.service.kill()
             self.assertTrue(self.device.service.start(), self.device.service.log_text())
             self.device.connect()
+        self.device.ledger()
         kept = self.device.ids()
         self.server.start()
         self.assertTrue(self.all_has_left(), self.device.logged())
@@ -146,7 +162,7 @@ class Outage(unittest.TestCase):
         self.assertEqual(events | gaps, set(range(1, max(self.device.ids()) + 1)))
         self.assertEqual(events & gaps, set())
         self.assertLessEqual(kept, events)
-        self.assertGreaterEqual(len(gaps), removed)
+        self.assertGreater(len(gaps), 1000)
 
 
 if __name__ == "__main__":

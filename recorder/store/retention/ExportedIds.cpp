@@ -16,7 +16,6 @@ namespace {
 // Longer than any id with its line's end.
 constexpr std::size_t kMostBytes = 32;
 
-// Without waiting for anybody, whatever stands there.
 std::optional<std::int64_t> readId(const std::filesystem::path& path) {
   const int file = ::open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY);
   if (file < 0) return std::nullopt;
@@ -37,18 +36,8 @@ std::optional<std::int64_t> readId(const std::filesystem::path& path) {
 
 }  // namespace
 
-void ExportedIds::setFile(const std::filesystem::path& file) {
-  file_ = file;
-  upTo_.reset();
-  nextLook_ = {};
-}
-
-std::optional<std::int64_t> ExportedIds::upTo(TimePoint now) {
-  if (!file_.empty() && now >= nextLook_) {
-    nextLook_ = now + kBetweenLooks;
-    upTo_ = readId(file_);
-  }
-  return upTo_;
+std::optional<std::int64_t> ExportedIds::read() const {
+  return file_.empty() ? std::nullopt : readId(file_);
 }
 
 }  // namespace tarn::recorder

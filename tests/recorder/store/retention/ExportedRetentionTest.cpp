@@ -13,8 +13,6 @@ namespace {
 constexpr std::int64_t kQuiet = 1000;
 constexpr std::int64_t kLoud = 1001;
 
-using TimePoint = ExportedIds::TimePoint;
-
 class ExportedIdsFile : public ::testing::Test {
  protected:
   std::filesystem::path path() const { return directory_.path() / "arrived"; }
@@ -22,7 +20,7 @@ class ExportedIdsFile : public ::testing::Test {
   std::optional<std::int64_t> read() const {
     ExportedIds ids;
     ids.setFile(path());
-    return ids.upTo(TimePoint());
+    return ids.read();
   }
 
   TemporaryDirectory directory_;
@@ -42,7 +40,7 @@ TEST_F(ExportedIdsFile, WhatIsNotThereOrSaysNothingTellsThatNothingLeaves) {
     write(text);
     EXPECT_EQ(read(), std::nullopt) << text;
   }
-  EXPECT_EQ(ExportedIds().upTo(TimePoint()), std::nullopt) << "no file is named";
+  EXPECT_EQ(ExportedIds().read(), std::nullopt) << "no file is named";
 }
 
 TEST_F(ExportedIdsFile, NobodyIsWaitedForWhateverStandsThere) {
@@ -53,22 +51,19 @@ TEST_F(ExportedIdsFile, NobodyIsWaitedForWhateverStandsThere) {
   EXPECT_EQ(read(), std::nullopt);
 }
 
-TEST_F(ExportedIdsFile, IsReadAgainNowAndThen) {
+TEST_F(ExportedIdsFile, IsReadAnewEachTime) {
   write("5\n");
   ExportedIds ids;
   ids.setFile(path());
-  const TimePoint begin{};
-  EXPECT_EQ(ids.upTo(begin), 5);
+  EXPECT_EQ(ids.read(), 5);
   write("6\n");
-  EXPECT_EQ(ids.upTo(begin + ExportedIds::kBetweenLooks - std::chrono::nanoseconds(1)), 5);
-  EXPECT_EQ(ids.upTo(begin + ExportedIds::kBetweenLooks), 6);
+  EXPECT_EQ(ids.read(), 6);
   std::filesystem::remove(path());
-  EXPECT_EQ(ids.upTo(begin + 2 * ExportedIds::kBetweenLooks), std::nullopt);
+  EXPECT_EQ(ids.read(), std::nullopt);
   write("7\n");
-  ids.setFile(path());
-  EXPECT_EQ(ids.upTo(begin + 2 * ExportedIds::kBetweenLooks), 7) << "another file is read at once";
+  EXPECT_EQ(ids.read(), 7);
   ids.setFile({});
-  EXPECT_EQ(ids.upTo(begin + 9 * ExportedIds::kBetweenLooks), std::nullopt);
+  EXPECT_EQ(ids.read(), std::nullopt);
 }
 
 class ExportedRetention : public RetentionFixture {
