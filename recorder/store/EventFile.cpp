@@ -25,10 +25,11 @@ constexpr int kBusyMilliseconds = 50;
 
 EventFile::EventFile(std::filesystem::path path, const RetentionLimits& limits, const platform::Clock& clock,
                      std::string boot)
-    : files_(std::move(path), clock), retention_(limits), time_(clock, std::move(boot)) {}
+    : files_(path, clock), cleanMark_(path, boot), retention_(limits), time_(clock, std::move(boot)) {}
 
 Status EventFile::open() {
   Status error = files_.prepare();
+  isAsLeft_ = cleanMark_.take();
   for (const auto step : {&EventFile::openConnection, &EventFile::checkContent, &EventFile::settleDoubt,
                           &EventFile::openTime, &EventFile::prepareStatements}) {
     if (error.failed()) break;
@@ -72,7 +73,7 @@ Status EventFile::openConnection() {
 }
 
 Status EventFile::checkContent() {
-  if (!files_.isKnownGood()) {
+  if (!files_.isKnownGood() && !isAsLeft_) {
     if (auto error = checkPages(connection_); error.failed()) return error;
   }
   Tables found = Tables::Current;
@@ -157,7 +158,11 @@ void EventFile::finalizeStatements() noexcept {
 void EventFile::close() noexcept {
   checkpointer_.close();
   finalizeStatements();
+  const bool wasOpen = isOpen();
   connection_.closeAndTidy();
+  if (wasOpen && files_.isKnownGood()) {
+    cleanMark_.leave();
+  }
 }
 
 void EventFile::closeAfterFault() noexcept {

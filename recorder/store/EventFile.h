@@ -32,6 +32,7 @@
 #include "recorder/store/SessionCheck.h"
 #include "recorder/store/SessionTable.h"
 #include "recorder/store/StoreCheck.h"
+#include "recorder/store/files/CleanMark.h"
 #include "recorder/store/files/StoreFiles.h"
 #include "recorder/store/retention/FileAges.h"
 #include "recorder/store/rows/Connection.h"
@@ -178,6 +179,8 @@ class EventFile {
   void finalizeStatements() noexcept;
 
   StoreFiles files_;
+  CleanMark cleanMark_;
+  bool isAsLeft_ = false;  // by the last one who closed it, when it was opened
   Connection connection_;
   Checkpointer checkpointer_;
   // Prepared once for each opening: these run with every commit, or every event.
