@@ -209,6 +209,8 @@ constexpr std::array kSettings{
         "paths", "trace_analysis", kAtRestart, [](auto& host) -> auto& { return host.paths.traceAnalysis; },
         TakeFile()),
     setting(
+        "paths", "exported", kAtOnce, [](auto& host) -> auto& { return host.recorder.exported; }, TakeFile()),
+    setting(
         "recorder", "enabled", kAtRestart, [](auto& host) -> auto& { return host.recorderEnabled; }, Take()),
     setting(
         "recorder", "max_megabytes", kAtOnce, [](auto& host) -> auto& { return host.recorder.maxMegabytes; },
@@ -218,8 +220,6 @@ constexpr std::array kSettings{
     setting(
         "recorder", "summary_max_age_days", kAtOnce,
         [](auto& host) -> auto& { return host.recorder.summaryMaxAgeDays; }, Days()),
-    setting(
-        "recorder", "exported", kAtOnce, [](auto& host) -> auto& { return host.recorder.exported; }, TakeFile()),
     setting(
         "recorder", "redundant", kAtRestart, [](auto& host) -> auto& { return host.recorder.redundant; }, Take()),
     setting(

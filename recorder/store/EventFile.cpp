@@ -20,6 +20,8 @@ namespace {
 constexpr std::int64_t kLogHeaderBytes = 32;
 constexpr std::int64_t kFrameHeaderBytes = 24;
 constexpr int kBusyMilliseconds = 50;
+// Read through in milliseconds, and no more than what the connection keeps of it in memory.
+constexpr std::int64_t kSmallBytes = 4 << 20;
 
 }  // namespace
 
@@ -73,6 +75,12 @@ Status EventFile::openConnection() {
 }
 
 Status EventFile::checkContent() {
+  const Result<std::int64_t> pages = connection_.readInteger("PRAGMA page_count");
+  if (pages.failed()) return pages.error;
+  // What is small stays in memory once it is read through, so a read that errs later can't come between.
+  if (pages.value * pageBytes_ <= kSmallBytes) {
+    isAsLeft_ = false;
+  }
   if (!files_.isKnownGood() && !isAsLeft_) {
     if (auto error = checkPages(connection_); error.failed()) return error;
   }

@@ -33,7 +33,7 @@ class ServedDevice(Device):
         for name in os.listdir(self.state):
             os.unlink(os.path.join(self.state, name))
         self.service = Service(SERVICE, folder, "[recorder]\nmax_megabytes = 1\n"
-                               f"exported = \"{self.own}/arrived\"\n")
+                               f"[paths]\nexported = \"{self.own}/arrived\"\n")
         self.client, self.sent = None, 0
 
     def close(self):

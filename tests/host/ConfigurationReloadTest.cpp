@@ -145,16 +145,12 @@ TEST(SettingValues, AdminIsSharedOrSeparate) {
 
 // Each setting is in force after a reload unless it waits for a restart, and then it is named.
 TEST(SettingEffects, EverySettingIsTakenOverOrWaits) {
-  const std::map<std::string, std::string> others{{"log.level", "\"debug\""},
-                                                  {"tally.in_use", "[]"},
-                                                  {"rtc.backends", "[]"},
-                                                  {"rtc.no_backends", "true"},
-                                                  {"rtc.available", "false"},
-                                                  {"snare.refuse", "\"DailyLimitExceeded\""},
-                                                  {"recorder.enabled", "false"},
-                                                  {"recorder.redundant", "\"mark\""},
-                                                  {"recorder.exported", "\"/other\""},
-                                                  {"access.admin", "\"separate\""}};
+  const std::map<std::string, std::string> others{
+      {"log.level", "\"debug\""},      {"tally.in_use", "[]"},
+      {"rtc.backends", "[]"},          {"rtc.no_backends", "true"},
+      {"rtc.available", "false"},      {"snare.refuse", "\"DailyLimitExceeded\""},
+      {"recorder.enabled", "false"},   {"recorder.redundant", "\"mark\""},
+      {"access.admin", "\"separate\""}};
   for (const SettingDescription& setting : describedSettings()) {
     const std::string name = std::string(setting.section) + "." + std::string(setting.key);
     SCOPED_TRACE(name);

@@ -51,12 +51,12 @@ diagnostic_logs = "/var/log/audio"
 flume = "/run/flume"
 alsa = "/proc/asound"
 trace_analysis = "/opt/analysis.so"
+exported = "/var/lib/exporter/arrived"
 [recorder]
 max_megabytes = 1
 max_age_days = 7
 summary_max_age_days = 14
 redundant = "mark"
-exported = "/var/lib/exporter/arrived"
 set_aside_max_age_days = 15
 summary_file_max_age_days = 16
 trace_max_age_days = 17

@@ -132,9 +132,10 @@ class CleanStart : public RecorderFixture {
     const std::array<timespec, 2> times{status.st_atim, status.st_mtim};
     ASSERT_EQ(::utimensat(AT_FDCWD, file().c_str(), times.data(), 0), 0);
   }
-  void fillAndStop() {
+  // Enough of it that reading it through takes long.
+  void fillAndStop(int events = 2000) {
     start();
-    recordMany(2000, 100);
+    recordMany(events, 3000);
     ASSERT_TRUE(flush());
     stop();
   }
@@ -148,6 +149,14 @@ TEST_F(CleanStart, AfterAnOrderlyEndTheFileIsNotReadThroughAgain) {
   start().waitUntilOpened();
   EXPECT_TRUE(filesSetAside().empty()) << "this could only be seen by reading it through";
   EXPECT_FALSE(std::filesystem::exists(file().string() + ".clean"));
+}
+
+TEST_F(CleanStart, ASmallFileIsReadThroughAllTheSame) {
+  fillAndStop(200);
+  damageWithoutATrace();
+  options_.verifyInterval = options_.verifyRest = std::chrono::hours(1);
+  start().waitUntilOpened();
+  EXPECT_FALSE(filesSetAside().empty());
 }
 
 TEST_F(CleanStart, WhatNobodySawChangeIsFoundWhileItRuns) {
