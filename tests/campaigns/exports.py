@@ -75,9 +75,7 @@ def play(context, figures, server, devices):
 
 
 def kill_one(device):
-    for process in device.processes:
-        process.kill()
-        process.wait()
+    device.kill()
     device.start()
 
 

@@ -24,6 +24,7 @@ class Server:
 
     def __init__(self, folder, extra="", tls=None):
         self.port, self.process, self.tls = free_port(), None, tls
+        os.makedirs(folder, exist_ok=True)
         self.configuration = os.path.join(folder, "nats.conf")
         self.log = os.path.join(folder, "nats.log")
         with open(self.configuration, "w", encoding="utf-8") as file:
@@ -33,9 +34,12 @@ class Server:
     def url(self):
         return f"nats://127.0.0.1:{self.port}"
 
-    def start(self):
+    def launch(self):
         with open(self.log, "ab") as log:
             self.process = subprocess.Popen([PROGRAM, "-c", self.configuration], stdout=log, stderr=log)
+
+    def start(self):
+        self.launch()
         until = time.monotonic() + PATIENCE
         while time.monotonic() < until:
             try:
@@ -46,8 +50,8 @@ class Server:
                 time.sleep(0.05)
         raise RuntimeError("nats-server doesn't answer")
 
-    def client(self):
-        return Client(self.port, self.tls)
+    def client(self, patience=5):
+        return Client(self.port, self.tls, patience)
 
     def end(self, how=signal.SIGKILL):
         if self.process and self.process.poll() is None:
@@ -58,10 +62,19 @@ class Server:
 class Client:
     """One connection; a question at a time."""
 
-    def __init__(self, port, tls=None):
-        self.socket = socket.create_connection(("127.0.0.1", port), timeout=5)
-        while not self.socket.recv(1) == b"\n":  # INFO; what comes after it may be TLS
-            pass
+    def __init__(self, port, tls=None, patience=5):
+        self.socket = socket.create_connection(("127.0.0.1", port), timeout=patience)
+        self.input = None
+        try:
+            self.greet(tls)
+        except OSError:
+            self.close()
+            raise
+
+    def greet(self, tls):
+        while (byte := self.socket.recv(1)) != b"\n":  # INFO; what comes after it may be TLS
+            if not byte:
+                raise OSError("the server is gone")
         if tls:
             self.socket = tls.wrap_socket(self.socket, server_hostname="localhost")
         self.input = self.socket.makefile("rb")
@@ -72,6 +85,11 @@ class Client:
         return self
 
     def __exit__(self, *_):
+        self.close()
+
+    def close(self):
+        if self.input:
+            self.input.close()
         self.socket.close()
 
     def line(self, first):
