@@ -45,10 +45,12 @@ def eventually(holds, patience=30):
 class Exporter:
     """The real program; all that is its own lies in a folder. close() ends what it started."""
 
-    def __init__(self, program, folder, machine="0123456789abcdef0123456789abcdef"):
+    def __init__(self, program, folder, machine="0123456789abcdef0123456789abcdef", state=""):
         self.program, self.folder = program, folder
-        self.state, self.own, self.log = (os.path.join(folder, name) for name in ("state", "own", "log"))
-        os.makedirs(self.state)
+        self.state = state or os.path.join(folder, "state")
+        self.own, self.log = (os.path.join(folder, name) for name in ("own", "log"))
+        for path in (folder, *(() if state else (self.state,))):
+            os.makedirs(path, exist_ok=True)
         self.processes = []
         self.write("fleet.key", "7" * 64)
         self.write("machine-id", machine + "\n")
@@ -106,6 +108,7 @@ class Device(Exporter):
         self.number, self.last = number, 0
         self.store = sqlite3.connect(os.path.join(self.state, "recorder.sqlite3"))
         self.store.executescript(TABLES)
+        self.store.execute("PRAGMA synchronous = OFF")  # who writes isn't what is tried
 
     def close(self):
         super().close()

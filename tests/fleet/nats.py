@@ -124,6 +124,25 @@ class Client:
     def messages(self, name="TARNREPORTING"):
         return self.ask(f"$JS.API.STREAM.INFO.{name}")["state"]["messages"]
 
+    def all_messages(self, name="TARNREPORTING"):
+        """(headers as text, bytes) of each, in their order."""
+        count, found = self.messages(name), []
+        question = json.dumps({"stream_name": name, "config": {
+            "deliver_subject": "deliver", "deliver_policy": "all", "ack_policy": "none", "replay_policy": "instant",
+            "num_replicas": 1, "mem_storage": True}}).encode()
+        self.socket.sendall(b"SUB deliver 2\r\nPUB $JS.API.CONSUMER.CREATE.%s answer %d\r\n%s\r\n"
+                            % (name.encode(), len(question), question))
+        while len(found) < count:
+            words = self.line((b"MSG", b"HMSG")).split()
+            data = self.input.read(int(words[-1]) + 2)[:-2]
+            if words[1] == b"answer":
+                if "error" in (answer := json.loads(data)):
+                    raise RuntimeError(f"{name}: {answer['error']}")
+                continue
+            head = int(words[-2]) if words[0] == b"HMSG" else 0
+            found.append((data[:head].decode(), data[head:]))
+        return found
+
     def message(self, sequence, name="TARNREPORTING"):
         """(headers as text, bytes) of a message."""
         import base64
