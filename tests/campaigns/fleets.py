@@ -5,6 +5,7 @@ Servers, collectors and exporters are killed meanwhile. What the database has at
 record of every device, with its own content, once, and the sums by hour are theirs. 250 seconds make a million records.
 """
 
+import json
 import os
 import signal
 import sys
@@ -12,6 +13,7 @@ import time
 
 FLEET = os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "fleet")
 sys.path[:0] = [FLEET, os.path.join(FLEET, "collect")]
+import batches  # noqa: E402
 import nats  # noqa: E402
 import postgres  # noqa: E402
 from cluster import Cluster  # noqa: E402
@@ -88,7 +90,7 @@ class Fleet:
         seconds = [min(each, context.seconds / 2) for each in SECONDS_BETWEEN_KILLS]
         killings = Killings(self.cluster, self.collectors, self.devices, seconds, context.seed)
         while recorded < context.seconds * RECORDS_A_SECOND:
-            while recorded < (context.seconds - context.left()) * RECORDS_A_SECOND:
+            while recorded < min(context.seconds, context.seconds - context.left()) * RECORDS_A_SECOND:
                 count = context.random.randint(1, MOST_AT_ONCE)
                 context.random.choice(self.devices).record(count)
                 recorded += count
@@ -117,20 +119,33 @@ class Fleet:
         self.figures["messages"] = self.cluster.of_stream()["state"]["messages"]
         self.figures["drain_s"] = time.monotonic() - begun
 
+    def in_stream(self):
+        """By device's number the ids that the stream has, read without the programs' code."""
+        found = {}
+        messages = self.cluster.use(lambda client: client.all_messages())
+        for _, message in messages:
+            batch = batches.read(message)
+            for each, payload in batch.events.items():
+                found.setdefault(json.loads(payload)["session_duration"], set()).add(each)
+        return found
+
     def judge(self):
         """Against what was recorded: a record's payload says which device's it is, and which."""
         found = {int(number): list(map(int, row)) for number, *row in self.database.ask("""
             SELECT payload ->> 'session_duration', count(DISTINCT device), count(*), count(DISTINCT id), min(id),
               max(id), count(*) FILTER (WHERE (payload ->> 'play_seconds')::bigint = id) FROM events GROUP BY 1""")}
+        exported = self.in_stream()
         stored = sum(row[1] for row in found.values())
         distinct = sum(row[2] for row in found.values())
         recorded = sum(device.last for device in self.devices)
-        self.figures.update(stored=stored, missing=recorded - distinct, double=stored - distinct)
+        self.figures.update(exported=sum(map(len, exported.values())), stored=stored, missing=recorded - distinct,
+                            double=stored - distinct)
         must = {device.number: [1, *[device.last] * 2, 1, *[device.last] * 2] for device in self.devices if device.last}
         for number in must.keys() | found.keys():
             if must.get(number) != found.get(number):
                 self.context.fail(f"device {number}: names, records, ids, first, last, right ones are "
-                                  f"{found.get(number)}, and must be {must.get(number)}")
+                                  f"{found.get(number)}, and must be {must.get(number)}; the stream has "
+                                  f"{len(exported.get(number, ()))} records of it")
         account = [int(each) for each in self.database.ask(
             "SELECT sum(made), sum(stored), sum(gaps), sum(left_out), sum(missing), sum(untold) FROM account")[0]]
         if account != [recorded, recorded, 0, 0, 0, 0]:

@@ -10,6 +10,8 @@ import urllib.request
 import nats
 
 PATIENCE = 60
+# For this long a message may be known that isn't there: its id was taken down by who lost the lead then.
+REPEATS_NANOSECONDS = 20_000_000_000
 ANSWER_SECONDS = 2  # a server that has no leader to ask says nothing
 
 
@@ -36,8 +38,9 @@ cluster {{ name: fleet, listen: "127.0.0.1:{port}", routes: [{routes}], no_adver
         self.until(self.is_whole, "keep one stream together")
 
     def try_to_make(self, options):
+        options = {"num_replicas": len(self.servers), "duplicate_window": REPEATS_NANOSECONDS, **options}
         try:
-            self.use(lambda client: client.make_stream(num_replicas=len(self.servers), **options))
+            self.use(lambda client: client.make_stream(**options))
         except RuntimeError:  # not all know of each other yet
             return False
         return True

@@ -62,9 +62,13 @@ class StreamSender final : public Sender {
     options.MaxWait = 2000;
     const auto until = std::chrono::steady_clock::now() + std::chrono::minutes(2);
     while (std::chrono::steady_clock::now() < until) {
-      if (js_Publish(nullptr, context_.get(), message.subject.c_str(), message.bytes.data(),
+      jsPubAck* acknowledgement = nullptr;
+      if (js_Publish(&acknowledgement, context_.get(), message.subject.c_str(), message.bytes.data(),
                      static_cast<int>(message.bytes.size()), &options, nullptr) == NATS_OK) {
-        return true;
+        // Without a number the server knows the message and doesn't have it.
+        const bool isThere = acknowledgement->Sequence > 0;
+        jsPubAck_Destroy(acknowledgement);
+        if (isThere) return true;
       }
       ctl::pauseUnlessStopped(kPause);
     }
