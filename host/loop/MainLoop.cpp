@@ -124,6 +124,7 @@ void MainLoop::waitUntil(std::chrono::nanoseconds deadline, platform::UniqueFunc
     }
   }
   waits_ = false;
+  queue_->wake();  // wake-ups ended here that were meant for the turn's hooks
 }
 
 // Waits for events as it was announced to the queue; how many there are.

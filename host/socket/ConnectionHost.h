@@ -118,13 +118,13 @@ class ConnectionHost {
   // is destroyed uncalled when it never will be. Without one there is nothing to commit. Set before anything runs.
   void setSettleSource(SettleSource source) { settle_ = std::move(source); }
   // Calls `done` when everything that was handed over before is on the disk, what the ends of connections made
-  // included.
-  void settle(platform::Work done) {
-    ends.afterThese([this, done = std::move(done)]() mutable {
-      if (settle_) {
-        settle_(std::move(done));
-      } else {
+  // included; `failed` when memory is missing to find that out. Of the two at most one is called.
+  void settle(platform::Work done, platform::Work failed) {
+    ends.afterThese([this, done = std::move(done), failed = std::move(failed)]() mutable {
+      if (!settle_) {
         done();
+      } else if (!MemoryReserve::orGiveUp(MemoryReserve::Loss::Work, [&] { settle_(std::move(done)); })) {
+        failed();
       }
     });
   }

@@ -105,11 +105,17 @@ void SocketConnection::hold(wire::DecodedRequest& request, std::size_t frameByte
 
 // All that was sent before it is dealt with by now; what that handed over is to be committed.
 void SocketConnection::settle(std::uint64_t id) {
-  host_.settle([sink = weak_from_this(), id] {
-    if (const auto connection = sink.lock()) {
-      connection->sendReply(id, {});
-    }
-  });
+  host_.settle(
+      [sink = weak_from_this(), id] {
+        if (const auto connection = sink.lock()) {
+          connection->sendReply(id, {});
+        }
+      },
+      [sink = weak_from_this(), id] {
+        if (const auto connection = sink.lock()) {
+          connection->refuseForMemory(id);
+        }
+      });
 }
 
 std::string SocketConnection::quotaRefusal(const wire::Request& request) {

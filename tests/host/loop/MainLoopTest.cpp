@@ -152,6 +152,22 @@ TEST_F(MainLoopTest, RunsDelayedWorkWhileItSleeps) {
   EXPECT_GE(ran.get_future().get() - begin, 15ms);
 }
 
+TEST_F(MainLoopTest, AHookThatIsWokenWhileAnotherOneWaitsLooksAfterwards) {
+  testing::RunningLoop running;
+  bool isWoken = false;
+  bool hasWaited = false;
+  std::atomic<bool> hasLooked{false};
+  running.loop.addTurnHook([&] { hasLooked = isWoken; });
+  running.loop.addTurnHook([&] {
+    if (std::exchange(hasWaited, true)) return;
+    isWoken = true;
+    running.loop.queue()->wake();
+    running.loop.waitUntil(running.clock.monotonic() + std::chrono::milliseconds(20), [] { return false; });
+  });
+  running.start();
+  EXPECT_TRUE(eventually([&] { return hasLooked.load(); }));
+}
+
 TEST_F(MainLoopTest, IsIdleWhenItHasNothingToDo) {
   running_.start();
   EXPECT_TRUE(eventually([&] { return running_.loop.progress().sample().idle; }));

@@ -182,6 +182,30 @@ TEST_F(SocketSharesTest, SettleWaitsForTheEndsOfClientsThatLeftBefore) {
   running_.onQueue([&] { host_->setSettleSource(nullptr); });
 }
 
+TEST_F(SocketSharesTest, SettleIsRefusedWhereMemoryIsMissingForItAlsoAfterTheEndsOfClients) {
+  service_->slices = 300;
+  serve();
+  running_.onQueue([&] { host_->setSettleSource([](const platform::Work&) { throw std::bad_alloc(); }); });
+  TestClient leaving(path_);
+  TestClient asking(path_);
+  ASSERT_TRUE(leaving.status() && asking.status());
+  const auto expectRefusal = [&asking] {
+    const auto reply = asking.reply();
+    ASSERT_TRUE(reply && reply->error);
+    EXPECT_EQ(reply->error->code, static_cast<std::int64_t>(wire::ErrorCode::OutOfMemory));
+  };
+  running_.onQueue([&] {
+    leaving.request(1, requestOf(Operation::StopReportingSessionForID, 7));
+    leaving.close();
+    asking.request(1, requestOf(Operation::Settle));
+  });
+  expectRefusal();
+  asking.request(2, requestOf(Operation::Settle));
+  expectRefusal();
+  EXPECT_TRUE(asking.status());
+  running_.onQueue([&] { host_->setSettleSource(nullptr); });
+}
+
 TEST_F(SocketSharesTest, ManyNumbersAreAnsweredInPiecesAndInOrder) {
   service_->reporters.clear();
   for (std::int64_t number = 0; number < 10'000; ++number) {
