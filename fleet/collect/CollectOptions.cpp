@@ -47,6 +47,7 @@ Settings settingsOf(CollectConfiguration& configuration) {
           {"server", "stream", takeText(configuration.stream)},
           {"server", "consumer", takeText(configuration.consumer)},
           {"server", "max_unacknowledged", takeWhole(configuration.mostUnacknowledged, 1, 1'000'000)},
+          {"server", "answer_seconds", takeWhole(configuration.answerSeconds, 1, 600)},
           {"server", "credentials_file", takeText(server.credentialsFile)},
           {"server", "authority_file", takeText(server.authorityFile)},
           {"server", "certificate_file", takeText(server.certificateFile)},

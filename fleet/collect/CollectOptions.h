@@ -48,6 +48,7 @@ struct CollectConfiguration {
   std::string stream = "TARNREPORTING";
   std::string consumer = "collect";  // all collectors of a database have the same
   std::int64_t mostUnacknowledged = 4096;
+  std::int64_t answerSeconds = 30;  // a message that isn't acknowledged within it goes to another collector
   std::string database = "dbname=tarnreporting";
   std::int64_t groupMessages = 64;
   std::int64_t retentionDays = 0;  // 0: nothing is dropped

@@ -7,8 +7,7 @@ namespace tarn::fleet {
 
 namespace {
 
-// Until a message that isn't acknowledged goes to another collector; longer than a group takes to be written.
-constexpr std::int64_t kPatienceNanoseconds = 30'000'000'000;
+constexpr std::int64_t kNanoseconds = 1'000'000'000;
 constexpr std::int64_t kFlushMilliseconds = 2000;
 // For the library's threads to end.
 constexpr std::int64_t kCloseMilliseconds = 5000;
@@ -44,7 +43,7 @@ Status JetStreamSource::join() {
   jsConsumerConfig_Init(&consumer);
   consumer.Durable = configuration_.consumer.c_str();
   consumer.AckPolicy = js_AckExplicit;
-  consumer.AckWait = kPatienceNanoseconds;
+  consumer.AckWait = configuration_.answerSeconds * kNanoseconds;
   consumer.MaxAckPending = configuration_.mostUnacknowledged;
   const std::string subject = configuration_.server.subject + ".>";
   consumer.FilterSubject = subject.c_str();

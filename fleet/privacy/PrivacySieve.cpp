@@ -40,8 +40,9 @@ bool PrivacySieve::allowsKind(std::string_view backend, std::string_view name) c
   if (backend == "tally" && name.substr(0, kMessages.size()) == kMessages) {
     const std::string_view kind = name.substr(kMessages.size());
     const std::size_t dot = kind.rfind('.');
-    if (dot == std::string_view::npos) return false;
-    return anyMatches(rules_.categories, kind.substr(0, dot)) && anyMatches(rules_.types, kind.substr(dot + 1));
+    if (dot != std::string_view::npos) {
+      return anyMatches(rules_.categories, kind.substr(0, dot)) && anyMatches(rules_.types, kind.substr(dot + 1));
+    }
   }
   return anyMatches(rules_.others, std::string(backend) + "/" + std::string(name));
 }

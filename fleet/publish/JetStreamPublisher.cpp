@@ -50,6 +50,10 @@ class JetStreamPublisher::Answers {
     if (acknowledgement == nullptr) {
       const bool hasText = error != nullptr && error->ErrText != nullptr;
       status = Error{error != nullptr ? error->ErrCode : 0, hasText ? error->ErrText : "no acknowledgement"};
+    } else if (acknowledgement->Sequence == 0) {
+      // It lost the lead of the stream between taking down the id and proposing the message. The id is forgotten when
+      // the stream's window for repeats is over, or told with a number when the message is there after all.
+      status = Error{0, "the server knows the message and doesn't have it"};
     }
     static_cast<Answers*>(answers)->take(id, std::move(status));
   }

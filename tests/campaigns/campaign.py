@@ -41,6 +41,7 @@ CAMPAIGNS = {
     "ringrestarts": ("ringrestarts", "the service ends and starts while programs post to rings: no call fails"),
     "streams": ("streams", "200 streams a minute of a real PipeWire: a session each, as long as it ran, none open"),
     "export": ("exports", "exporters, a proxy that refuses, loses and reorders, kills: the stream has all, once"),
+    "fleet": ("fleets", "200 exporters, proxies, three servers, collectors, kills: the database has all, once"),
     "ends": ("ends", "SIGTERM at random moments under load: all that was answered is there, once"),
     "restarts": ("restarts", "restarts with the socket kept, under 5,000 messages a second of the libraries' programs"),
     "reloads": ("reloads", "the configuration is read anew under load, a tenth broken: no client notices"),

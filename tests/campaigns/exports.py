@@ -75,9 +75,7 @@ def play(context, figures, server, devices):
 
 
 def kill_one(device):
-    for process in device.processes:
-        process.kill()
-        process.wait()
+    device.kill()
     device.start()
 
 
@@ -101,10 +99,10 @@ def judge(context, figures, server, devices):
     """Against what was recorded: which device, which ids, and what each says."""
     found, names = {}, set()  # payloads by id, by device
     with server.client() as client:
-        figures["messages"] = client.messages()
-        for number in range(figures["messages"]):
-            headers, message = client.message(number + 1)
-            one_message(context, figures, headers, message, found, names)
+        messages = client.all_messages()
+    figures["messages"] = len(messages)
+    for headers, message in messages:
+        one_message(context, figures, headers, message, found, names)
     if len(found) != len(devices):
         context.fail(f"{len(devices)} devices, {len(found)} in the stream")
     # A device's name there is a hash, so its events tell which it is.

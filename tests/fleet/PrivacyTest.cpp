@@ -185,8 +185,10 @@ TEST(PrivacySieve, OtherEventsGoByBackEndAndNameAndStayUnlessAllowed) {
   Rules rules;
   EXPECT_FALSE(PrivacySieve(rules, someKey()).allowsKind("rtc", "sendMessage"));
   EXPECT_FALSE(PrivacySieve(rules, someKey()).allowsKind("tally", "sys.oxbow.longformaudio.Volume.Summary"));
-  rules.others = {"snare/*", "tally/sys.oxbow.longformaudio.*"};
+  EXPECT_FALSE(PrivacySieve(rules, someKey()).allowsKind("tally", "sys.oxbow.tarnkit.clientuptime"));
+  rules.others = {"snare/*", "tally/sys.oxbow.longformaudio.*", "tally/sys.oxbow.tarnkit.*"};
   PrivacySieve sieve(rules, someKey());
+  EXPECT_TRUE(sieve.allowsKind("tally", "sys.oxbow.tarnkit.clientuptime"));
   EXPECT_TRUE(sieve.allowsKind("snare", "requestSnapshot"));
   EXPECT_TRUE(sieve.allowsKind("tally", "sys.oxbow.longformaudio.Volume.Summary"));
   EXPECT_FALSE(sieve.allowsKind("rtc", "sendMessage"));

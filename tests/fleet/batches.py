@@ -4,6 +4,7 @@ Buffers as fleet/format/batch.proto needs."""
 
 import ctypes
 import ctypes.util
+import functools
 import struct
 from dataclasses import dataclass
 
@@ -21,17 +22,20 @@ class Batch:
     events: dict  # payloads by id
 
 
-def unpacked(frame):
-    library = ctypes.util.find_library("zstd")
-    zstd = ctypes.CDLL(library or "libzstd.so.1")
+@functools.cache
+def zstd_library():
+    zstd = ctypes.CDLL(ctypes.util.find_library("zstd") or "libzstd.so.1")
     zstd.ZSTD_decompress.restype = zstd.ZSTD_compressBound.restype = ctypes.c_size_t
     zstd.ZSTD_decompress.argtypes = [ctypes.c_char_p, ctypes.c_size_t, ctypes.c_char_p, ctypes.c_size_t]
     zstd.ZSTD_isError.argtypes = [ctypes.c_size_t]
-    plain = ctypes.create_string_buffer(MOST_BYTES)
-    size = zstd.ZSTD_decompress(plain, MOST_BYTES, frame, len(frame))
-    if zstd.ZSTD_isError(size):
+    return zstd
+
+
+def unpacked(frame, plain=ctypes.create_string_buffer(MOST_BYTES)):
+    size = zstd_library().ZSTD_decompress(plain, MOST_BYTES, frame, len(frame))
+    if zstd_library().ZSTD_isError(size):
         raise ValueError("no zstd frame")
-    return plain.raw[:size]
+    return ctypes.string_at(plain, size)
 
 
 def number_at(data, place):

@@ -1,5 +1,5 @@
 # SPDX-License-Identifier: Apache-2.0
-"""A made-up device: a store as the recorder writes it, and the real tarnreporting-export beside it."""
+"""The real tarnreporting-export, also beside a made-up device: a store as the recorder writes it."""
 
 import json
 import os
@@ -42,48 +42,29 @@ def eventually(holds, patience=30):
     return False
 
 
-class Device:
-    """All that is its own lies in a folder. close() ends what it started."""
+class Exporter:
+    """The real program; all that is its own lies in a folder. close() ends what it started."""
 
-    def __init__(self, program, folder, machine="0123456789abcdef0123456789abcdef", number=0):
-        self.program, self.folder, self.number = program, folder, number
-        self.state, self.own, self.log = (os.path.join(folder, name) for name in ("state", "own", "log"))
-        os.makedirs(self.state)
-        self.store = sqlite3.connect(os.path.join(self.state, "recorder.sqlite3"))
-        self.store.executescript(TABLES)
-        self.last, self.processes = 0, []
+    def __init__(self, program, folder, machine="0123456789abcdef0123456789abcdef", state=""):
+        self.program, self.folder = program, folder
+        self.state = state or os.path.join(folder, "state")
+        self.own, self.log = (os.path.join(folder, name) for name in ("own", "log"))
+        for path in (folder, *(() if state else (self.state,))):
+            os.makedirs(path, exist_ok=True)
+        self.processes = []
         self.write("fleet.key", "7" * 64)
         self.write("machine-id", machine + "\n")
 
     def close(self):
-        for process in self.processes:
-            process.kill()
-            process.wait()
-        self.store.close()
+        self.kill()
 
     def write(self, name, text):
         with open(os.path.join(self.folder, name), "w", encoding="utf-8") as file:
             file.write(text)
 
-    def configure(self, server, mode="export"):
-        self.write("export.toml", f"[privacy]\nmode = \"{mode}\"\nkey_file = \"{self.folder}/fleet.key\"\n"
+    def configure(self, server, mode="export", privacy=""):
+        self.write("export.toml", f"[privacy]\nmode = \"{mode}\"\nkey_file = \"{self.folder}/fleet.key\"\n{privacy}"
                    f"[server]\n{server}\n")
-
-    def payload(self, event):
-        return f'{{"play_seconds":{event},"session_duration":{self.number}}}'
-
-    def record(self, count):
-        """Events that say their id and the device's number."""
-        ids = range(self.last + 1, self.last + count + 1)
-        with self.store:
-            self.store.executemany("INSERT INTO event_texts VALUES(?, NULL, NULL, ?)",
-                                   [(2 * each, self.payload(each)) for each in ids])
-            self.store.executemany(
-                "INSERT INTO event_texts VALUES(?, 'tally', 'sys.oxbow.tarnkit.Volume.Summary', '{}')",
-                [(2 * each + 1,) for each in ids])
-            self.store.executemany("INSERT INTO event_rows VALUES(?, ?, 0, 0, NULL, 1)",
-                                   [(each, RECORDED) for each in ids])
-        self.last += count
 
     def command(self, *words):
         return [self.program, "--config", os.path.join(self.folder, "export.toml"), "--state-dir", self.state,
@@ -102,6 +83,11 @@ class Device:
         self.processes.append(process)
         return process
 
+    def kill(self):
+        for process in self.processes:
+            process.kill()
+            process.wait()
+
     def cursor(self):
         try:
             with open(os.path.join(self.own, "cursor"), encoding="utf-8") as file:
@@ -112,3 +98,34 @@ class Device:
     def logged(self):
         with open(self.log, encoding="utf-8") as file:
             return file.read()
+
+
+class Device(Exporter):
+    """An exporter beside a store that the test itself fills."""
+
+    def __init__(self, program, folder, machine="0123456789abcdef0123456789abcdef", number=0):
+        super().__init__(program, folder, machine)
+        self.number, self.last = number, 0
+        self.store = sqlite3.connect(os.path.join(self.state, "recorder.sqlite3"))
+        self.store.executescript(TABLES)
+        self.store.execute("PRAGMA synchronous = OFF")  # who writes isn't what is tried
+
+    def close(self):
+        super().close()
+        self.store.close()
+
+    def payload(self, event):
+        return f'{{"play_seconds":{event},"session_duration":{self.number}}}'
+
+    def record(self, count):
+        """Events that say their id and the device's number."""
+        ids = range(self.last + 1, self.last + count + 1)
+        with self.store:
+            self.store.executemany("INSERT INTO event_texts VALUES(?, NULL, NULL, ?)",
+                                   [(2 * each, self.payload(each)) for each in ids])
+            self.store.executemany(
+                "INSERT INTO event_texts VALUES(?, 'tally', 'sys.oxbow.tarnkit.Volume.Summary', '{}')",
+                [(2 * each + 1,) for each in ids])
+            self.store.executemany("INSERT INTO event_rows VALUES(?, ?, 0, 0, NULL, 1)",
+                                   [(each, RECORDED) for each in ids])
+        self.last += count

@@ -24,6 +24,7 @@ class Server:
 
     def __init__(self, folder, extra="", tls=None):
         self.port, self.process, self.tls = free_port(), None, tls
+        os.makedirs(folder, exist_ok=True)
         self.configuration = os.path.join(folder, "nats.conf")
         self.log = os.path.join(folder, "nats.log")
         with open(self.configuration, "w", encoding="utf-8") as file:
@@ -33,9 +34,12 @@ class Server:
     def url(self):
         return f"nats://127.0.0.1:{self.port}"
 
-    def start(self):
+    def launch(self):
         with open(self.log, "ab") as log:
             self.process = subprocess.Popen([PROGRAM, "-c", self.configuration], stdout=log, stderr=log)
+
+    def start(self):
+        self.launch()
         until = time.monotonic() + PATIENCE
         while time.monotonic() < until:
             try:
@@ -46,8 +50,8 @@ class Server:
                 time.sleep(0.05)
         raise RuntimeError("nats-server doesn't answer")
 
-    def client(self):
-        return Client(self.port, self.tls)
+    def client(self, patience=5):
+        return Client(self.port, self.tls, patience)
 
     def end(self, how=signal.SIGKILL):
         if self.process and self.process.poll() is None:
@@ -58,10 +62,19 @@ class Server:
 class Client:
     """One connection; a question at a time."""
 
-    def __init__(self, port, tls=None):
-        self.socket = socket.create_connection(("127.0.0.1", port), timeout=5)
-        while not self.socket.recv(1) == b"\n":  # INFO; what comes after it may be TLS
-            pass
+    def __init__(self, port, tls=None, patience=5):
+        self.socket = socket.create_connection(("127.0.0.1", port), timeout=patience)
+        self.input = None
+        try:
+            self.greet(tls)
+        except OSError:
+            self.close()
+            raise
+
+    def greet(self, tls):
+        while (byte := self.socket.recv(1)) != b"\n":  # INFO; what comes after it may be TLS
+            if not byte:
+                raise OSError("the server is gone")
         if tls:
             self.socket = tls.wrap_socket(self.socket, server_hostname="localhost")
         self.input = self.socket.makefile("rb")
@@ -72,6 +85,11 @@ class Client:
         return self
 
     def __exit__(self, *_):
+        self.close()
+
+    def close(self):
+        if self.input:
+            self.input.close()
         self.socket.close()
 
     def line(self, first):
@@ -105,6 +123,25 @@ class Client:
 
     def messages(self, name="TARNREPORTING"):
         return self.ask(f"$JS.API.STREAM.INFO.{name}")["state"]["messages"]
+
+    def all_messages(self, name="TARNREPORTING"):
+        """(headers as text, bytes) of each, in their order."""
+        count, found = self.messages(name), []
+        question = json.dumps({"stream_name": name, "config": {
+            "deliver_subject": "deliver", "deliver_policy": "all", "ack_policy": "none", "replay_policy": "instant",
+            "num_replicas": 1, "mem_storage": True}}).encode()
+        self.socket.sendall(b"SUB deliver 2\r\nPUB $JS.API.CONSUMER.CREATE.%s answer %d\r\n%s\r\n"
+                            % (name.encode(), len(question), question))
+        while len(found) < count:
+            words = self.line((b"MSG", b"HMSG")).split()
+            data = self.input.read(int(words[-1]) + 2)[:-2]
+            if words[1] == b"answer":
+                if "error" in (answer := json.loads(data)):
+                    raise RuntimeError(f"{name}: {answer['error']}")
+                continue
+            head = int(words[-2]) if words[0] == b"HMSG" else 0
+            found.append((data[:head].decode(), data[head:]))
+        return found
 
     def message(self, sequence, name="TARNREPORTING"):
         """(headers as text, bytes) of a message."""

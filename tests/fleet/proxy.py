@@ -11,6 +11,8 @@ from dataclasses import dataclass, field
 
 REFUSAL = json.dumps({"type": "io.nats.jetstream.api.v1.pub_ack_response",
                       "error": {"code": 503, "err_code": 10077, "description": "refused on the way"}}).encode()
+# What a server says that was about to propose a message when it lost the lead: it knows the name, and has no message.
+KNOWN = json.dumps({"stream": "TARNREPORTING", "seq": 0, "duplicate": True}).encode()
 
 
 @dataclass
@@ -25,10 +27,11 @@ class Pair:
 
 
 class Proxy:
-    def __init__(self, server_port, seed, refused=0.0, lost=0.0, reordered=0.0):
+    def __init__(self, server_port, seed, refused=0.0, lost=0.0, reordered=0.0, known=0.0):
+        self.known = known
         self.server_port, self.refused, self.lost, self.reordered = server_port, refused, lost, reordered
         self.random = random.Random(seed)
-        self.counts = {"published": 0, "refused": 0, "lost": 0, "reordered": 0}
+        self.counts = {"published": 0, "refused": 0, "lost": 0, "reordered": 0, "known": 0}
         self.listener = socket.create_server(("127.0.0.1", 0), backlog=256)
         self.port = self.listener.getsockname()[1]
         self.selector = selectors.DefaultSelector()
@@ -113,13 +116,21 @@ class Proxy:
                 pair.inbox = words[-1]
             if words[0] == b"HPUB" and len(words) == 5 and not words[1].startswith(b"$JS"):
                 self.counts["published"] += 1
-                if self.random.random() < self.refused:
-                    self.counts["refused"] += 1
-                    down += b"MSG %s %s %d\r\n%s\r\n" % (words[2], pair.inbox, len(REFUSAL), REFUSAL)
+                answer = self.answer_instead()
+                if answer:
+                    down += b"MSG %s %s %d\r\n%s\r\n" % (words[2], pair.inbox, len(answer), answer)
                     continue
             up += whole
         pair.server.sendall(up)
         pair.client.sendall(down)
+
+    def answer_instead(self):
+        """What is said of a message that is kept back; nothing where it goes on."""
+        for name, share, answer in (("refused", self.refused, REFUSAL), ("known", self.known, KNOWN)):
+            if share and self.random.random() < share:
+                self.counts[name] += 1
+                return answer
+        return b""
 
     def carry_down(self, pair):
         down = bytearray()

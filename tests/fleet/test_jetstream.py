@@ -15,6 +15,7 @@ import unittest
 sys.path.insert(0, os.path.dirname(os.path.abspath(__file__)))
 import nats  # noqa: E402
 from exporting import RECORDED, Device, eventually  # noqa: E402
+from proxy import Proxy  # noqa: E402
 
 EXPORT = os.environ["EXPORT"]
 MESSAGE_ID = re.compile(r"Nats-Msg-Id: *([0-9a-f]{32})\.(\d+)-(\d+)\.[0-9a-f]{32}")
@@ -108,6 +109,21 @@ class JetStream(unittest.TestCase):
         with self.server.client() as client:
             client.change_stream(max_msgs=-1)
         self.assertTrue(eventually(lambda: self.device.cursor() == 200), self.device.logged())
+
+    def test_a_message_that_is_known_and_not_there_has_not_arrived(self):
+        self.server.start()
+        self.make_stream()
+        proxy = Proxy(self.server.port, 1, known=1.0)
+        self.addCleanup(proxy.close)
+        self.device.configure(f"urls = \"nats://127.0.0.1:{proxy.port}\"")
+        self.device.record(100)
+        self.device.start()
+        self.assertTrue(eventually(lambda: "messages aren't taken: " in self.device.logged()), self.device.logged())
+        self.assertIn("knows the message and doesn't have it", self.device.logged())
+        self.assertEqual(self.device.cursor(), 0)
+        proxy.known = 0.0
+        self.assertTrue(eventually(lambda: self.device.cursor() == 100), self.device.logged())
+        self.assertEqual(self.arrived(), [(1, 100)])
 
     def test_status_tells_how_far_it_is_and_what_went_wrong(self):
         self.device.record(100)

@@ -18,7 +18,7 @@ namespace tarn::reporting {
 
 // As many as the service opens rings for one connection. Places of a fixed array, so that nothing is allocated to mark
 // where each writer is.
-inline constexpr std::size_t kMostWriters = 32;
+inline constexpr std::size_t kMostWriters = 32;  // a session has a bit for each
 // Shapes of a session that posting of fields made. A program that makes up keys would else use up the client's 1024.
 inline constexpr std::uint32_t kMostFieldShapes = TARNREPORTING_MOST_FIELD_SETS;
 
@@ -47,8 +47,10 @@ struct tarnreporting_session {
   bool announced = false;       // on this connection
   // An ended session that no service ever saw is kept until one has, so that what was posted to it is served.
   bool everAnnounced = false;
-  // Nothing is posted to it any more; `end` counts.
+  // Nothing more is posted to it; `end` counts.
   bool ending = false;
+  // A bit for each writer where `end` isn't known yet: what a call publishes that was inside is the session's, too.
+  std::uint32_t inside = 0;
   tarn::reporting::Heads end;  // when the session was ended: what lies before belongs to it
 };
 
@@ -140,9 +142,11 @@ struct tarnreporting_client {
   void forget(std::uint32_t shapeNumber) noexcept;
   // The shape of that request is, or with 0 all are.
   void forgotten(std::uint64_t request) noexcept;
-  // Notes that the session is ended and where the writers are now. A second time does nothing.
+  // Notes that the session is ended. A second time does nothing.
   void markEnding(Session& session) noexcept;
-  // Ends and frees the sessions whose messages are all taken while nobody is inside a post.
+  // For the writers that everybody has left since: where they are.
+  void markEnd(Session& session) noexcept;
+  // Ends and frees the sessions whose messages are all taken.
   void tendSessions() noexcept;
   // A shape that isn't known to the session yet. Null when there is no memory.
   tarnreporting_shape* makeShape(Session& session, const tarnreporting_shape_options& options) noexcept;

@@ -38,6 +38,7 @@ bool isTaken(const tarnreporting_writer& writer) noexcept {
 // The next writer in this place begins at 0.
 void forgetWriter(tarnreporting_session& session, std::size_t slot) noexcept {
   session.end.at[slot] = 0;
+  session.inside &= ~(1U << slot);
   for (tarnreporting_shape* shape = session.shapes; shape != nullptr; shape = shape->next) {
     if (shape->lastUse != nullptr) {
       shape->lastUse->at[slot] = 0;

@@ -63,11 +63,23 @@ int tarnreporting_client::endSession(Session& session) noexcept {
   return TARNREPORTING_OK;
 }
 
-// What the writers have published by now may be the session's.
 void tarnreporting_client::markEnding(Session& session) noexcept {
   if (session.ending) return;
   session.ending = true;
-  mark(session.end);
+  for (std::size_t i = 0; i < kMostWriters; ++i) {
+    session.inside |= writers_[i] != nullptr ? 1U << i : 0U;
+  }
+  markEnd(session);
+}
+
+// What a writer has published by then may be the session's. A call that was inside when the session was ended may still
+// publish one: would the service be told of the end before it has read that, it would wait for its shape for ever.
+void tarnreporting_client::markEnd(Session& session) noexcept {
+  for (std::size_t i = 0; i < kMostWriters; ++i) {
+    if ((session.inside & 1U << i) == 0 || isInside(*writers_[i])) continue;
+    session.end.at[i] = __atomic_load_n(&writers_[i]->header->head, __ATOMIC_ACQUIRE);
+    session.inside &= ~(1U << i);
+  }
 }
 
 void tarnreporting_client::mark(Heads& heads) const noexcept {
@@ -195,7 +207,8 @@ void tarnreporting_client::tendSessions() noexcept {
   Session* next = nullptr;
   for (Session* session = sessions_; session != nullptr; session = next) {
     next = session->next;
-    if (session->ending && isDrained(session->end) && !anybodyInside()) {
+    markEnd(*session);
+    if (session->ending && session->inside == 0 && isDrained(session->end)) {
       if (linked_ && session->announced) {
         finish(*session);
       }

@@ -152,13 +152,15 @@ TEST(FleetCollectOptions, WhatExcludesEachOtherIsWrongUsage) {
 
 TEST(FleetCollectOptions, TheConfigurationSaysWhereAndHowLong) {
   const auto read = parseCollectConfiguration(
-      "[server]\nurls = \"nats://a:1,nats://b:2\"\nstream = \"S\"\nconsumer = \"c\"\n[database]\nurl = "
+      "[server]\nurls = \"nats://a:1,nats://b:2\"\nstream = \"S\"\nconsumer = \"c\"\nanswer_seconds = "
+      "7\n[database]\nurl = "
       "\"dbname=x\"\ngroup_messages = 8\n[retention]\ndays = 30\n",
       "collect.toml");
   ASSERT_TRUE(read.ok()) << read.error.text();
   EXPECT_EQ(read.value.server.urls, "nats://a:1,nats://b:2");
   EXPECT_EQ(read.value.stream, "S");
   EXPECT_EQ(read.value.consumer, "c");
+  EXPECT_EQ(read.value.answerSeconds, 7);
   EXPECT_EQ(read.value.database, "dbname=x");
   EXPECT_EQ(read.value.groupMessages, 8);
   EXPECT_EQ(read.value.retentionDays, 30);

@@ -62,9 +62,13 @@ class StreamSender final : public Sender {
     options.MaxWait = 2000;
     const auto until = std::chrono::steady_clock::now() + std::chrono::minutes(2);
     while (std::chrono::steady_clock::now() < until) {
-      if (js_Publish(nullptr, context_.get(), message.subject.c_str(), message.bytes.data(),
+      jsPubAck* acknowledgement = nullptr;
+      if (js_Publish(&acknowledgement, context_.get(), message.subject.c_str(), message.bytes.data(),
                      static_cast<int>(message.bytes.size()), &options, nullptr) == NATS_OK) {
-        return true;
+        // Without a number the server knows the message and doesn't have it.
+        const bool isThere = acknowledgement->Sequence > 0;
+        jsPubAck_Destroy(acknowledgement);
+        if (isThere) return true;
       }
       ctl::pauseUnlessStopped(kPause);
     }
@@ -74,6 +78,22 @@ class StreamSender final : public Sender {
  private:
   fleet::NatsOwned<natsConnection> connection_;
   fleet::NatsOwned<jsCtx> context_;
+};
+
+// So many messages a second and no more; 0: as many as are taken.
+class Pace {
+ public:
+  explicit Pace(double aSecond) : aSecond_(aSecond), next_(std::chrono::steady_clock::now()) {}
+  void wait() {
+    if (aSecond_ <= 0) return;
+    ctl::pauseUnlessStopped(next_ - std::chrono::steady_clock::now());
+    next_ +=
+        std::chrono::duration_cast<std::chrono::steady_clock::duration>(std::chrono::duration<double>(1 / aSecond_));
+  }
+
+ private:
+  const double aSecond_;
+  std::chrono::steady_clock::time_point next_;
 };
 
 // What no device of ours would send: no message, one whose payload is no JSON, and one whose texts no database takes.
@@ -107,11 +127,13 @@ void tell(const FleetTruth& truth) {
       static_cast<long long>(truth.overloads), static_cast<long long>(truth.messages), truth.playSeconds);
 }
 
-int run(const FleetShape& shape, Sender& sender, bool isOdd) {
+int run(const FleetShape& shape, double aSecond, Sender& sender, bool isOdd) {
   const MadeUpFleet made(shape);
   fleet::MessagePacker packer;
+  Pace pace(aSecond);
   std::vector<Message> odd = isOdd ? oddMessages(packer) : std::vector<Message>();
   for (std::size_t i = 0; i < made.messages(); ++i) {
+    pace.wait();
     fleet::v1::Batch batch = made.batch(i);
     auto packed = packer.pack(batch);
     // By its number: what comes again is to arrive, since a stream knows only so long what it had.
@@ -131,6 +153,7 @@ int main(int argumentCount, char** arguments) {
   using namespace tarn::testing;
   FleetShape shape;
   std::string folder, url;
+  double aSecond = 0;
   bool isOdd = false;
   CLI::App app;
   app.add_option("--devices", shape.devices);
@@ -139,14 +162,15 @@ int main(int argumentCount, char** arguments) {
   app.add_option("--repeat", shape.repeat);
   app.add_option("--seed", shape.seed);
   app.add_option("--begin", shape.begin);
+  app.add_option("--a-second", aSecond);
   app.add_option("--folder", folder);
   app.add_option("--url", url);
   app.add_flag("--odd", isOdd);
   CLI11_PARSE(app, argumentCount, arguments);
   if (!folder.empty()) {
     FolderSender sender(folder);
-    return run(shape, sender, isOdd);
+    return run(shape, aSecond, sender, isOdd);
   }
   StreamSender sender(url);
-  return run(shape, sender, isOdd);
+  return run(shape, aSecond, sender, isOdd);
 }

@@ -163,6 +163,19 @@ class Stream(Collecting):
         self.assertEqual(self.drain(patience=15), (0, 0), self.said())
         self.assert_even(truth)
 
+    def test_what_a_killed_one_held_goes_to_another_after_answer_seconds(self):
+        self.configure(server={"urls": self.server.url, "answer_seconds": 2})
+        collector = self.start()
+        self.eventually(lambda: self.database.ask("SELECT to_regclass('refused')") == [["refused"]])
+        self.database.ask("ALTER TABLE told RENAME TO hidden")
+        truth = self.truth(self.send("--devices", 3, "--ids", 1000, "--seed", SEED))
+        self.eventually(lambda: "told" in self.said())
+        self.end(collector, signal.SIGKILL)
+        self.database.ask("ALTER TABLE hidden RENAME TO told")
+        self.start()
+        self.assertEqual(self.drain(patience=15), (0, 0), self.said())
+        self.assert_even(truth)
+
     def test_what_nothing_can_be_made_of_does_not_come_again(self):
         self.start()
         truth = self.truth(self.send("--devices", 2, "--ids", 600, "--seed", SEED, "--odd"))
