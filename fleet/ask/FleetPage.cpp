@@ -158,6 +158,11 @@ std::vector<Stretch> stretchesOf(const std::vector<PlayedHour>& hours) {
   return stretches;
 }
 
+// "3 h", "7 d"
+std::string lengthText(double length) {
+  return length < kDay ? numberText(length / kHour) + " h" : numberText(length / kDay) + " d";
+}
+
 std::string beginText(const Stretch& stretch) {
   return stretch.length < kDay ? report::timeText(stretch.begin).substr(0, 16) : report::dayText(stretch.begin);
 }
@@ -180,7 +185,7 @@ void writeTime(Markup& markup, const FleetPicture& picture) {
     markup.line().element("p", {}, "Nothing was played.").close();
     return;
   }
-  const std::string each = report::durationText(stretches.front().length);
+  const std::string each = lengthText(stretches.front().length);
   markup.line().element("h3", {}, "Play");
   drawColumns(markup, {"play", "Play", "A column for each " + each + ": the hours played by all devices."}, play,
               "hours of play");
