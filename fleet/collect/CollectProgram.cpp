@@ -60,7 +60,7 @@ class Program {
       : options_(options), configuration_(configuration), log_(kProgram, options.logLevel) {}
 
   int migrateAlone() {
-    if (Status opened = database_.open(configuration_.database); opened.failed()) return fail(*opened);
+    if (Status opened = database_.open(configuration_.database, kProgram); opened.failed()) return fail(*opened);
     const Result<int> applied = migrate(database_);
     if (applied.failed()) return fail(*applied.error);
     log_.write(LogLevel::Default, std::to_string(applied.value) + " steps of the layout applied");
@@ -133,7 +133,7 @@ class Program {
   }
 
   [[nodiscard]] Status openDatabase() {
-    if (Status opened = database_.open(configuration_.database); opened.failed()) return opened;
+    if (Status opened = database_.open(configuration_.database, kProgram); opened.failed()) return opened;
     const Result<bool> isReady = isMigrated(database_);
     if (isReady.failed()) return isReady.error;
     if (!isReady.value && options_.keepLayout) {

@@ -51,9 +51,20 @@ std::string_view Answer::text(int row, int column) const {
   return {PQgetvalue(result_.get(), row, column), static_cast<std::size_t>(PQgetlength(result_.get(), row, column))};
 }
 
+bool Answer::isNull(int row, int column) const {
+  return PQgetisnull(result_.get(), row, column) == 1;
+}
+
 std::int64_t Answer::number(int row, int column) const {
   const std::string_view digits = text(row, column);
   std::int64_t value = 0;
+  std::from_chars(digits.data(), digits.data() + digits.size(), value);
+  return value;
+}
+
+double Answer::real(int row, int column) const {
+  const std::string_view digits = text(row, column);
+  double value = 0;
   std::from_chars(digits.data(), digits.data() + digits.size(), value);
   return value;
 }
@@ -69,8 +80,8 @@ void Database::Finish::operator()(pg_conn* connection) const {
   PQfinish(connection);
 }
 
-Status Database::open(const std::string& url) {
-  const char* const values[] = {"5", "10", "5", "3", "20000", "tarnreporting-collect", url.c_str(), nullptr};
+Status Database::open(const std::string& url, const char* program) {
+  const char* const values[] = {"5", "10", "5", "3", "20000", program, url.c_str(), nullptr};
   connection_.reset(PQconnectdbParams(kNames, values, 1));
   if (isOpen()) {
     // Days and hours are those of UTC. Notices tell of what is meant to be so.
@@ -136,6 +147,18 @@ void Database::rollBack() {
   if (isOpen() && PQtransactionStatus(connection_.get()) != PQTRANS_IDLE && run("ROLLBACK").failed()) {
     close();
   }
+}
+
+Status checkDatabaseUrl(const std::string& url) {
+  // A name alone is a database's.
+  if (url.find('=') == std::string::npos && url.find("://") == std::string::npos) return {};
+  char* text = nullptr;
+  PQconninfoOption* const options = PQconninfoParse(url.c_str(), &text);
+  const std::string why = text == nullptr ? "out of memory" : lineOf(text);
+  PQfreemem(text);
+  if (options == nullptr) return Error{kFaultOfData, why};
+  PQconninfoFree(options);
+  return {};
 }
 
 std::string arrayOf(const std::vector<std::string>& texts) {

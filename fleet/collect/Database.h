@@ -33,7 +33,9 @@ class Answer {
   int rows() const;
   // Empty where it is null.
   std::string_view text(int row, int column) const;
+  bool isNull(int row, int column) const;
   std::int64_t number(int row, int column) const;
+  double real(int row, int column) const;
   // Rows that the statement changed.
   std::int64_t changed() const;
 
@@ -47,8 +49,9 @@ class Answer {
 class Database {
  public:
   Database() = default;
-  // `url`: as PostgreSQL's tools take it, a URL or words with values. Waits a few seconds for an answer.
-  [[nodiscard]] Status open(const std::string& url);
+  // `url`: as PostgreSQL's tools take it, a URL or words with values. Waits a few seconds for an answer. `program` is
+  // what the server is told of who asks.
+  [[nodiscard]] Status open(const std::string& url, const char* program);
   bool isOpen() const;
   void close() { connection_.reset(); }
 
@@ -72,6 +75,8 @@ class Database {
   std::unique_ptr<pg_conn, Finish> connection_;
 };
 
+// What is wrong with a URL, or with words and their values; whether anybody answers there is another question.
+[[nodiscard]] Status checkDatabaseUrl(const std::string& url);
 // What a statement takes as an array of texts: {"a","b"}.
 std::string arrayOf(const std::vector<std::string>& texts);
 

@@ -15,7 +15,7 @@ namespace {
 
 constexpr std::string_view kVolumeSummary = "sys.oxbow.tarnkit.Volume.Summary";
 constexpr std::string_view kMessages = "sys.oxbow.tarnkit.";
-constexpr std::string_view kOverload = R"("issue_type":"overload")";
+constexpr std::string_view kIssue = R"("issue_type":)";
 constexpr std::int64_t kMicrosecondsPerDay = 86'400'000'000;
 
 std::string dayText(std::int64_t day) {
@@ -200,7 +200,7 @@ std::vector<std::string> GroupRows::days() const {
 
 bool isMeasured(const v1::Kind& kind, const v1::Event& event) {
   if (kind.backend() != "tally" || !kind.name().starts_with(kMessages)) return false;
-  return kind.name() == kVolumeSummary || event.payload().find(kOverload) != std::string::npos;
+  return kind.name() == kVolumeSummary || event.payload().find(kIssue) != std::string::npos;
 }
 
 std::string leftOutOf(const v1::Batch& batch) {

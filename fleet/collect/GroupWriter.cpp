@@ -71,13 +71,14 @@ measured AS (
       left(coalesce(s.payload ->> 'active_devices', ''), 200) AS route, left(s.release, 200) AS release,
       CASE WHEN s.name = 'sys.oxbow.tarnkit.Volume.Summary' THEN number_of(s.payload -> 'play_seconds') END AS played,
       number_of(s.payload -> 'KvSessionVolume') AS volume,
-      (s.payload ->> 'issue_type' = 'overload' AND NOT s.payload ? 'overload_count')::integer AS overloads
+      (s.payload ->> 'issue_type' = 'overload' AND NOT s.payload ? 'overload_count')::integer AS overloads,
+      left(s.payload ->> 'issue_type', 200) AS issue_type
     FROM side_events AS s JOIN added AS a USING (device, run, id, time) WHERE s.release IS NOT NULL),
 hour AS (
   INSERT INTO hour_parts AS h
   SELECT hour, application, route, release, $1::smallint, count(played), coalesce(sum(played), 0),
       coalesce(sum(overloads), 0)
-    FROM measured GROUP BY 1, 2, 3, 4 ORDER BY 1, 2, 3, 4
+    FROM measured WHERE played IS NOT NULL OR overloads > 0 GROUP BY 1, 2, 3, 4 ORDER BY 1, 2, 3, 4
   ON CONFLICT (hour, application, route, release, keeper) DO UPDATE SET segments = h.segments + excluded.segments,
     play_seconds = h.play_seconds + excluded.play_seconds, overloads = h.overloads + excluded.overloads),
 volume AS (
@@ -86,7 +87,14 @@ volume AS (
       sum(played)
     FROM measured WHERE played IS NOT NULL AND volume IS NOT NULL GROUP BY 1, 2, 3, 4, 5 ORDER BY 1, 2, 3, 4, 5
   ON CONFLICT (hour, application, route, release, tenth, keeper) DO UPDATE
-    SET play_seconds = h.play_seconds + excluded.play_seconds)
+    SET play_seconds = h.play_seconds + excluded.play_seconds),
+issue AS (
+  INSERT INTO hour_issue_parts AS h
+  SELECT hour, issue_type, $1::smallint, count(*) FROM measured WHERE issue_type IS NOT NULL GROUP BY 1, 2 ORDER BY 1, 2
+  ON CONFLICT (hour, issue_type, keeper) DO UPDATE SET issues = h.issues + excluded.issues),
+stored AS (
+  INSERT INTO stored_parts AS p SELECT device, $1::smallint, count(*) FROM added GROUP BY 1 ORDER BY 1
+  ON CONFLICT (device, keeper) DO UPDATE SET records = p.records + excluded.records)
 SELECT count(*) FROM added)";
 
 constexpr const char* kAddTold = R"(

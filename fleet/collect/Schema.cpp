@@ -70,4 +70,15 @@ Result<bool> isMigrated(Database& database) {
   return {version.value == schemaSteps().back().version, {}};
 }
 
+Status requireLayout(Database& database) {
+  const Result<std::int64_t> version = versionOf(database);
+  if (version.failed()) return version.error;
+  const int known = schemaSteps().back().version;
+  if (version.value >= known) return refuseLater(version.value);
+  const std::string is = version.value == 0 ? "it has no tables of tarnreporting-collect"
+                                            : "its layout is version " + std::to_string(version.value) + ", and " +
+                                                  std::to_string(known) + " is asked";
+  return Error{kFaultOfPlace, "database: " + is + " (tarnreporting-collect --migrate brings it up to date)"};
+}
+
 }  // namespace tarn::fleet

@@ -25,5 +25,7 @@ std::span<const SchemaStep> schemaSteps();
 Result<int> migrate(Database& database);
 // Whether all is applied.
 Result<bool> isMigrated(Database& database);
+// For those who only ask: the error says what is wrong with the layout, and what brings it up to date.
+[[nodiscard]] Status requireLayout(Database& database);
 
 }  // namespace tarn::fleet

@@ -162,5 +162,16 @@ TEST(Seconds, AreANumberBetweenTheTwo) {
   }
 }
 
+TEST(DurationText, IsAsCoarseAsItIsLong) {
+  EXPECT_EQ(durationText(0), "0.0 s");
+  EXPECT_EQ(durationText(59.94), "59.9 s");
+  EXPECT_EQ(durationText(59.95), "1 min 00 s");
+  EXPECT_EQ(durationText(200), "3 min 20 s");
+  EXPECT_EQ(durationText(3599.4), "59 min 59 s");
+  EXPECT_EQ(durationText(3599.5), "1 h 00 min");
+  EXPECT_EQ(durationText(90061), "25 h 01 min");
+  EXPECT_EQ(durationText(-1), "0.0 s");
+}
+
 }  // namespace
 }  // namespace tarn::ctl

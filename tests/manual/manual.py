@@ -47,7 +47,7 @@ class Table(unittest.TestCase):
         programs = pages.commands()
         self.assertEqual(sorted(programs),
                          ["tarnreporting-alsa", "tarnreporting-collect", "tarnreporting-export",
-                          "tarnreporting-pipewire", "tarnreportingctl", "tarnreportingd"])
+                          "tarnreporting-fleet", "tarnreporting-pipewire", "tarnreportingctl", "tarnreportingd"])
         self.assertGreater(len(programs["tarnreportingctl"]["commands"]), 10)
         self.assertIn("--state-dir", completions.names(programs["tarnreportingd"]))
 
@@ -56,8 +56,8 @@ class Pages(unittest.TestCase):
     def test_there_is_one_for_each_thing_that_somebody_looks_up(self):
         self.assertEqual([os.path.basename(path)[:-3] for path in templates()], [
             "libtarnreporting.3", "tarnreporting-alsa.1", "tarnreporting-collect.1", "tarnreporting-export.1",
-            "tarnreporting-pipewire.1", "tarnreporting-schema.5", "tarnreporting-wire.7", "tarnreporting.7",
-            "tarnreportingctl.1", "tarnreportingd.8", "tarnreportingd.toml.5"])
+            "tarnreporting-fleet.1", "tarnreporting-pipewire.1", "tarnreporting-schema.5", "tarnreporting-wire.7",
+            "tarnreporting.7", "tarnreportingctl.1", "tarnreportingd.8", "tarnreportingd.toml.5"])
 
     def test_every_option_and_every_command_stands_in_the_page_of_its_program(self):
         for name in pages.commands():

@@ -197,6 +197,15 @@ class InstalledTree(unittest.TestCase):
             told = [line for line in done.stderr.splitlines() if "tarnreporting-collect" in line]
             self.assertEqual(told, [])
 
+    def test_the_program_that_asks_is_there_with_it_and_found_beside_the_tool(self):
+        program = self.at("bin/tarnreporting-fleet")
+        if not os.path.exists(program):
+            self.assertFalse(os.path.exists(self.at("bin/tarnreporting-collect")))
+            return
+        done = run(self.at("bin/tarnreportingctl"), "fleet", "top", "--db", f"host={self.folder}")
+        self.assertEqual(done.returncode, 69, done.stderr)
+        self.assertTrue(done.stderr.startswith("tarnreporting-fleet: database: "), done.stderr)
+
     def test_the_installed_configuration_is_read_and_may_be_absent(self):
         path = self.at("etc/tarnreporting/tarnreportingd.toml")
         command = [self.at("bin", "tarnreportingd"), "--state-dir", path + "/none",

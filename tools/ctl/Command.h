@@ -56,6 +56,9 @@ void addReportCommand(CLI::App& app, Context& context);
 // Shows the open sessions, what waits and the ledger, again and again (views/TopLoop).
 void addTopCommand(CLI::App& app, Context& context);
 
+// Hands a question over many devices to the program that answers it.
+void addFleetCommand(CLI::App& app, Context& context);
+
 // Lists the sessions that the recorder holds.
 void addSessionsCommand(CLI::App& app, Context& context);
 // Tells what one of them did, on one screen.

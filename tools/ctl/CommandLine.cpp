@@ -65,6 +65,7 @@ void describeCommandLine(CLI::App& app, Context& context, Options& options, cons
   addExportCommand(app, context);
   addReportCommand(app, context);
   addTopCommand(app, context);
+  addFleetCommand(app, context);
 }
 
 }  // namespace tarn::ctl

@@ -89,10 +89,11 @@ ROOMS = {
         "fleet/cursor", "fleet/publish", "fleet/format", "fleet/privacy", "fleet/program", "fleet/store",
         "host/loop", "host/settings", "host/system", "tools/ctl/terminal", "wire"),
     "fleet/collect": VALUES + ("fleet/format", "fleet/program", "fleet/publish", "host/system", "tools/ctl/terminal"),
+    "fleet/ask": VALUES + ("fleet/collect", "recorder/store", "tools/ctl/terminal", "tools/report"),
     "tools/ctl": PROGRAM + ("client", "dictionary", "tools/script", "tools/ctl/terminal"),
     "tools/ctl/sessions": PROGRAM + ("tools/ctl", "tools/ctl/terminal", "tools/report", "tools/script"),
     "tools/ctl/views": PROGRAM + ("client", "tools/ctl", "tools/ctl/terminal", "tools/report"),
-    "tools/manual": PROGRAM + ("tools/ctl", "adapters/pipewire", "fleet/collect", "fleet/export"),
+    "tools/manual": PROGRAM + ("tools/ctl", "adapters/pipewire", "fleet/ask", "fleet/collect", "fleet/export"),
     # What checks the service shares no code with it, but for the client and the reader of the recorder's file.
     "tests/scenario": VALUES + ("client", "wire", "recorder/store/rows", "recorder/store", "recorder/store/reading"),
 }

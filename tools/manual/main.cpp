@@ -8,6 +8,7 @@
 #include <string>
 
 #include "adapters/pipewire/AdapterOptions.h"
+#include "fleet/ask/AskOptions.h"
 #include "fleet/collect/CollectOptions.h"
 #include "fleet/export/ExportOptions.h"
 #include "host/settings/ServiceOptions.h"
@@ -99,6 +100,13 @@ Json collectJson() {
   return commandJson(app);
 }
 
+Json askJson() {
+  CLI::App app;
+  fleet::AskOptions options;
+  fleet::describeAskCommand(app, options);
+  return commandJson(app);
+}
+
 Json toolJson() {
   CLI::App app;
   ctl::Context context;
@@ -112,9 +120,9 @@ Json toolJson() {
 
 int main() {
   using tarn::streams::Adapter;
-  const auto programs =
-      tarn::Json::array({tarn::serviceJson(), tarn::toolJson(), tarn::adapterJson(Adapter::Alsa),
-                         tarn::adapterJson(Adapter::PipeWire), tarn::exportJson(), tarn::collectJson()});
+  const auto programs = tarn::Json::array({tarn::serviceJson(), tarn::toolJson(), tarn::adapterJson(Adapter::Alsa),
+                                           tarn::adapterJson(Adapter::PipeWire), tarn::exportJson(),
+                                           tarn::collectJson(), tarn::askJson()});
   std::cout << programs.dump(1) << '\n';
   return std::cout.good() ? 0 : 1;
 }

@@ -85,7 +85,7 @@ def table_of(options):
 
 
 # Examples of help texts that nobody can run just so.
-NOT_RUN = {"kill": "ends the machine's service", "top": "shows until it is interrupted"}
+NOT_RUN = {"fleet": "it needs servers", "kill": "ends the machine's service", "top": "shows until it is interrupted"}
 
 
 def footer_of(command):

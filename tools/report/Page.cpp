@@ -4,9 +4,9 @@
 #include <set>
 
 #include "tools/report/Markup.h"
+#include "tools/report/PageFrame.h"
 #include "tools/report/RangeSection.h"
 #include "tools/report/SessionSection.h"
-#include "tools/report/Style.h"
 #include "tools/report/Table.h"
 #include "tools/report/Texts.h"
 
@@ -21,21 +21,7 @@ std::string nameText(const std::string& name) {
   return name.empty() ? "unknown" : shortened(name, kNameCharacters);
 }
 
-void writeHead(Markup& markup) {
-  markup.literal("<!DOCTYPE html>\n");
-  markup.open("html", {{"xmlns", "http://www.w3.org/1999/xhtml"}, {"lang", "en"}, {"xml:lang", "en"}});
-  markup.line().open("head").empty("meta", {{"charset", "utf-8"}});
-  // Nothing is fetched or run, whatever stands in the page.
-  markup.line().empty("meta", {{"http-equiv", "Content-Security-Policy"},
-                               {"content", "default-src 'none'; style-src 'unsafe-inline'"}});
-  markup.line().empty("meta", {{"name", "viewport"}, {"content", "width=device-width, initial-scale=1"}});
-  markup.line().element("title", {}, "Audio sessions: report");
-  markup.line().open("style").literal(kStyleSheet).close();
-  markup.line().close();
-}
-
 void writeIntroduction(Markup& markup, const Report& report) {
-  markup.element("h1", {}, "Audio sessions: report");
   std::string text = "Made at " + preciseTimeText(report.made) + ". All times are UTC.";
   if (report.range) {
     text += " From " + timeText(report.range->from) + " to " + timeText(report.range->to) + ": " +
@@ -137,15 +123,14 @@ void writeWithRange(Markup& markup, const Report& report) {
 
 std::string page(const Report& report) {
   Markup markup;
-  writeHead(markup);
-  markup.line().open("body").line().open("main");
+  openPage(markup, "Audio sessions: report");
   writeIntroduction(markup, report);
   if (report.range) {
     writeWithRange(markup, report);
   } else {
     writeSections(markup, sectionsWithin(report.sessions, std::nullopt));
   }
-  markup.line().close().line().close().line().close().line();
+  closePage(markup);
   return markup.written();
 }
 

@@ -108,6 +108,8 @@ TEST(FleetGroupRows, HoursCountWhatWasPlayedAndWhatWentWrongAsMessagesTellIt) {
   EXPECT_FALSE(isMeasured(kind, event));
   event.set_payload(R"({"issue_type":"overload"})");
   EXPECT_TRUE(isMeasured(kind, event));
+  event.set_payload(R"({"issue_type":"silence"})");
+  EXPECT_TRUE(isMeasured(kind, event));
   kind.set_backend("rtc");
   EXPECT_FALSE(isMeasured(kind, event));
 }

@@ -56,6 +56,18 @@ class Collecting(unittest.TestCase):
         self.assertEqual(self.database.number("SELECT count(*) FROM events"), truth["events"])
         self.assertEqual(self.database.number("SELECT count(*) FROM sessions"), truth["sessions"])
         self.assert_hours(truth)
+        self.assert_counts()
+
+    def assert_counts(self):
+        """What is counted is what is there."""
+        same = "device, name, made, stored, gaps, left_out, missing, untold, records"
+        counted = "device, name, made, records, gaps, left_out, missing, untold, records"
+        self.assertEqual(self.database.ask(f"SELECT {counted} FROM account_by_counts ORDER BY 1"),
+                         self.database.ask(f"SELECT {same} FROM account ORDER BY 1"))
+        self.assertEqual(self.database.ask("""
+            SELECT * FROM hour_issues FULL JOIN (SELECT date_trunc('hour', time, 'UTC') AS hour, issue_type,
+              count(*) AS counted FROM v_issues GROUP BY 1, 2) AS i USING (hour, issue_type)
+            WHERE issues IS DISTINCT FROM counted"""), [])
 
     def assert_hours(self, truth):
         ask = self.database.number

@@ -2,16 +2,13 @@
 #include "tools/ctl/sessions/SessionOverview.h"
 
 #include <algorithm>
-#include <array>
-#include <cmath>
-#include <cstdio>
 #include <map>
 #include <optional>
 #include <utility>
 
-#include "tools/ctl/sessions/JsonObject.h"
 #include "tools/ctl/sessions/SessionEvents.h"
 #include "tools/ctl/sessions/SessionMessage.h"
+#include "tools/ctl/terminal/JsonObject.h"
 
 namespace tarn::ctl {
 
@@ -156,19 +153,6 @@ std::string overviewJson(const SessionOverview& overview) {
   }
   object.addArray("periods", periods).add("messages", overview.messages).add("redundant", overview.redundant);
   return object.add("overloads", overview.overloads).text();
-}
-
-std::string durationText(double seconds) {
-  std::array<char, 48> text{};
-  const auto whole = static_cast<long long>(std::clamp(std::round(seconds), 0.0, 1e15));
-  if (seconds < 59.95) {
-    std::snprintf(text.data(), text.size(), "%.1f s", std::max(0.0, seconds));
-  } else if (whole < 3600) {
-    std::snprintf(text.data(), text.size(), "%lld min %02lld s", whole / 60, whole % 60);
-  } else {
-    std::snprintf(text.data(), text.size(), "%lld h %02lld min", whole / 3600, whole % 3600 / 60);
-  }
-  return text.data();
 }
 
 }  // namespace tarn::ctl

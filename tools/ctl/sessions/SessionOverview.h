@@ -34,7 +34,4 @@ Result<std::vector<SessionOverview>> overviewsOf(recorder::SessionReader& reader
 // One object: the columns of the row, then running, active, periods, messages, redundant, overloads.
 std::string overviewJson(const SessionOverview& overview);
 
-// "1 h 02 min", "3 min 20 s", "12.5 s"
-std::string durationText(double seconds);
-
 }  // namespace tarn::ctl

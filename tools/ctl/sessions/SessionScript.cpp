@@ -9,7 +9,7 @@
 #include "plist/formats/Json.h"
 #include "service/vocabulary/TarnReportingVocabulary.h"
 #include "session/TarnReportingSessionKeys.h"
-#include "tools/ctl/sessions/JsonObject.h"
+#include "tools/ctl/terminal/JsonObject.h"
 #include "tools/script/VocabularyNames.h"
 
 namespace tarn::ctl {

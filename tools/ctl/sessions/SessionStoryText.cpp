@@ -6,8 +6,8 @@
 
 #include "host/system/JsonValues.h"
 #include "plist/formats/Json.h"
-#include "tools/ctl/sessions/JsonObject.h"
 #include "tools/ctl/sessions/SessionStory.h"
+#include "tools/ctl/terminal/JsonObject.h"
 #include "tools/ctl/terminal/TextTable.h"
 
 namespace tarn::ctl {

@@ -6,7 +6,7 @@
 #include <limits>
 #include <optional>
 
-#include "tools/ctl/sessions/JsonObject.h"
+#include "tools/ctl/terminal/JsonObject.h"
 
 namespace tarn::ctl {
 

@@ -14,6 +14,12 @@ namespace {
 // Bytes that are worth a write.
 constexpr std::size_t kMostWaiting = std::size_t{64} << 10;
 
+// As it was called, where that is one of ours; it may be linked to anything that tests it.
+std::string programName() {
+  const std::string_view called = program_invocation_short_name;
+  return std::string(called.starts_with("tarnreporting") ? called : "tarnreportingctl");
+}
+
 }  // namespace
 
 bool Output::line(std::string_view text) {
@@ -49,7 +55,7 @@ int Output::status() {
 }
 
 void complain(std::string_view text) {
-  const std::string line = "tarnreportingctl: " + printable(text) + "\n";
+  const std::string line = programName() + ": " + printable(text) + "\n";
   std::fwrite(line.data(), 1, line.size(), stderr);
 }
 

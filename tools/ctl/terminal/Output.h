@@ -58,7 +58,8 @@ class Output {
   Status failure_;
 };
 
-// Writes "tarnreportingctl: TEXT" to stderr, printable(). One line; what it says is a sentence without a full stop.
+// Writes "tarnreportingctl: TEXT", or another program's name, to stderr, printable(). One line; what it says is a
+// sentence without a full stop.
 void complain(std::string_view text);
 
 // Whether a place is named, by an option or by the environment; complains when not.

@@ -2,10 +2,12 @@
 #include "tools/ctl/terminal/TimeOption.h"
 
 #include <CLI/CLI.hpp>
+#include <algorithm>
 #include <array>
 #include <charconv>
 #include <chrono>
 #include <cmath>
+#include <cstdio>
 #include <ctime>
 
 #include "plist/ValueView.h"
@@ -157,6 +159,19 @@ std::string localTimeText(double epochSeconds, const TimeZone& zone) {
   std::string text;
   plist::appendDateAndTime(text, zone.dateAt(epochSeconds), ' ');
   return text;
+}
+
+std::string durationText(double seconds) {
+  std::array<char, 48> text{};
+  const auto whole = static_cast<long long>(std::clamp(std::round(seconds), 0.0, 1e15));
+  if (seconds < 59.95) {
+    std::snprintf(text.data(), text.size(), "%.1f s", std::max(0.0, seconds));
+  } else if (whole < 3600) {
+    std::snprintf(text.data(), text.size(), "%lld min %02lld s", whole / 60, whole % 60);
+  } else {
+    std::snprintf(text.data(), text.size(), "%lld h %02lld min", whole / 3600, whole % 3600 / 60);
+  }
+  return text.data();
 }
 
 void TimeRange::addTo(CLI::App& command, const std::string& what) {

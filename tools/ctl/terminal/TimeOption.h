@@ -38,6 +38,9 @@ Result<double> parseTime(std::string_view text, double now, const TimeZone& zone
 // "2026-11-20 10:00:00" in the zone.
 std::string localTimeText(double epochSeconds, const TimeZone& zone);
 
+// "1 h 02 min", "3 min 20 s", "12.5 s"
+std::string durationText(double seconds);
+
 // Of --since and --until, as they were given.
 struct TimeRange {
   std::string sinceText;

@@ -1,5 +1,5 @@
 // SPDX-License-Identifier: Apache-2.0
-#include "tools/ctl/sessions/JsonObject.h"
+#include "tools/ctl/terminal/JsonObject.h"
 
 #include "plist/EscapedText.h"
 #include "plist/formats/Json.h"
