@@ -113,18 +113,23 @@ void MainLoop::waitUntil(std::chrono::nanoseconds deadline, platform::UniqueFunc
   // What comes meanwhile isn't the work of whoever waits.
   const WorkLane::Scope noLane(nullptr);
   const WorkOwner noSession(0);
+  bool wasWoken = false;
   while (!isOver() && !stopping_.load(std::memory_order_relaxed)) {
     flushAll();
     const auto left = deadline - clock_.monotonic();
     if (left <= std::chrono::nanoseconds::zero()) break;
-    if (queue_->prepareToWait()) {
-      Events events;
-      const std::size_t count = sleep(events, left);
-      dispatchAll({events.data(), count});
+    if (!queue_->prepareToWait()) {
+      wasWoken = true;
+      continue;
     }
+    Events events;
+    const std::size_t count = sleep(events, left);
+    dispatchAll({events.data(), count});
   }
   waits_ = false;
-  queue_->wake();  // wake-ups ended here that were meant for the turn's hooks
+  if (wasWoken) {
+    queue_->wake();  // that may have been meant for the turn's hooks
+  }
 }
 
 // Waits for events as it was announced to the queue; how many there are.

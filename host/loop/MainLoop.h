@@ -95,7 +95,8 @@ class MainLoop {
 
   // For a piece of work that waits on purpose: until `isOver` or the deadline, handlers are called and flushes made as
   // ever, but no work is run. It ends early once the loop was stopped, and does nothing inside itself. `isOver` is
-  // asked again after each event and each wake() of the queue; a turn in which the hooks look comes after it.
+  // asked again after each event and each wake() of the queue, and after such a one the hooks look once more when it is
+  // over.
   void waitUntil(std::chrono::nanoseconds deadline, platform::UniqueFunction<bool()> isOver);
   // Whether the queue's work waits in waitUntil().
   bool waits() const noexcept { return waits_; }
