@@ -5,6 +5,8 @@ service keeps in reserve. So do those of a start and of an end.
 The service may refuse that client's requests or close its connection. It lives, leaves nothing of that client behind,
 serves another client, whose messages are in the store once, accounts for every message, and ends in order. A start may
 fail, with a line and a status.
+
+All of them are tens of thousands. PART is a share of the ordinals, as 2of3: three processes with one seed try all.
 """
 
 import time
@@ -232,8 +234,18 @@ class Trials:
         return None
 
 
+def ordinal_of(trial):
+    return trial[2][-2]
+
+
+def step_of(trial):
+    """How far the ordinals of such trials are apart."""
+    return IN_A_ROW[trial[2][-1]]
+
+
 def all_trials(context, trials):
     """(name, function, arguments) of each: every ordinal of every scenario, and beside them starts and ends."""
+    share, shares = context.share()
     scenes, lives = [], []
     counts = {scenario: trials.count(scenario) + MARGIN for scenario in SCENARIOS}
     start, end = trials.count_life()
@@ -244,6 +256,9 @@ def all_trials(context, trials):
                        for ordinal in range(first, count + 1, step)]
         lives += [("start", trials.one_start, (ordinal, many)) for ordinal in range(first, start + 1, step)]
         lives += [("end", trials.one_end, (ordinal, many)) for ordinal in range(first, end + 1, step)]
+    # By ordinal, as each process counts for itself.
+    scenes, lives = ([trial for trial in each if ordinal_of(trial) // step_of(trial) % shares == share]
+                     for each in (scenes, lives))
     context.random.shuffle(scenes)
     context.random.shuffle(lives)
     mixed = []
@@ -270,3 +285,5 @@ def run(context, figures):
         else:
             figures["survived"] += 1
     trials.account()
+    if context.only:
+        context.tell_part(context.only, figures)

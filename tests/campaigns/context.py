@@ -3,6 +3,7 @@
 
 import os
 import random
+import re
 import resource
 import time
 from collections.abc import Callable
@@ -36,6 +37,13 @@ class Context:
 
     def left(self):
         return self.seconds - (time.monotonic() - self.begun)
+
+    def share(self):
+        """Which of how many shares a part as "2of5" is: (1, 5); no part is all."""
+        match = re.fullmatch(r"(\d+)of(\d+)", self.only or "1of1")
+        if match is None or not 0 < int(match[1]) <= int(match[2]):
+            raise ValueError(f"{self.only!r} is no share as 2of5")
+        return int(match[1]) - 1, int(match[2])
 
     def fail(self, text):
         self.failures.append(text)

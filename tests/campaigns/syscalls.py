@@ -12,7 +12,6 @@ waits, for a store that tries again or for a peer, so some run side by side. PAR
 """
 
 import os
-import re
 import shutil
 import time
 from collections import Counter, deque
@@ -207,23 +206,16 @@ def faults_of(sites, random):
     return [fault for _, fault in sorted(turns, key=lambda turn: turn[0])]
 
 
-def share_of(sites, part):
-    """The sites of a part, "2of5"; of none, all."""
-    if not part:
-        return sites
-    match = re.fullmatch(r"(\d+)of(\d+)", part)
-    if match is None or not 0 < int(match[1]) <= int(match[2]):
-        raise ValueError(f"{part!r} is no share as 2of5")
-    # By what a site is, which is the same in each run. Sites are odd.
-    return {(kind, site): count for (kind, site), count in sites.items()
-            if site // 2 % int(match[2]) == int(match[1]) - 1}
+def share_of(sites, part, parts):
+    """By what a site is, which is the same in each run. Sites are odd."""
+    return {(kind, site): count for (kind, site), count in sites.items() if site // 2 % parts == part}
 
 
 def run(context, figures):
     figures.update(tried=0, of=0)
     old = old_store(context)
     workers = [Trials(context, old) for _ in range(SIDE_BY_SIDE)]
-    sites = share_of(workers[0].learn(), context.only)
+    sites = share_of(workers[0].learn(), *context.share())
     workers[0].figures.clear()
     faults = faults_of(sites, context.random)
     figures.update(of=len(faults), sites=len(sites), calls=sum(sites.values()))

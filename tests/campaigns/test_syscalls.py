@@ -27,17 +27,9 @@ class Sites(unittest.TestCase):
         self.assertEqual({kind for kind, *_ in faults[:2]}, {"read", "sync"})
 
     def test_are_each_in_one_share(self):
-        shares = [syscalls.share_of(SITES, f"{number}of3") for number in (1, 2, 3)]
+        shares = [syscalls.share_of(SITES, part, 3) for part in range(3)]
         self.assertEqual(sum(map(len, shares)), len(SITES))
         self.assertEqual({key: count for share in shares for key, count in share.items()}, SITES)
-
-    def test_are_all_of_them_without_a_share(self):
-        self.assertEqual(syscalls.share_of(SITES, ""), SITES)
-
-    def test_of_no_share_are_refused(self):
-        for part in ("0of3", "4of3", "half"):
-            with self.assertRaises(ValueError):
-                syscalls.share_of(SITES, part)
 
 
 if __name__ == "__main__":
