@@ -202,7 +202,7 @@ class InstalledTree(unittest.TestCase):
         if not os.path.exists(program):
             self.assertFalse(os.path.exists(self.at("bin/tarnreporting-collect")))
             return
-        done = run(self.at("bin/tarnreportingctl"), "fleet", "top", "--db", f"host={self.folder}")
+        done = run(self.at("bin/tarnreportingctl"), "fleet", "top", "--db", f"host='{self.folder}'")
         self.assertEqual(done.returncode, 69, done.stderr)
         self.assertTrue(done.stderr.startswith("tarnreporting-fleet: database: "), done.stderr)
 
