@@ -24,14 +24,19 @@ void StartWithoutMemory::over() noexcept {
 }
 
 void StartWithoutMemory::end() noexcept {
+  // Without an exception: there was no memory for one either, nor what the runtime keeps for them.
+  bool isShortage = true;
   try {
     if (const std::exception_ptr reason = std::current_exception()) {
       std::rethrow_exception(reason);
     }
   } catch (const std::bad_alloc&) {
+  } catch (...) {  // what the usual end tells
+    isShortage = false;
+  }
+  if (isShortage) {
     static_cast<void>(std::fputs("tarnreportingd: out of memory\n", stderr));
     std::_Exit(EXIT_FAILURE);
-  } catch (...) {  // what the usual end tells
   }
   kStart.usual_();
   std::abort();
