@@ -5,7 +5,9 @@
 #include <sys/stat.h>
 
 #include <algorithm>
+#include <array>
 #include <limits>
+#include <string_view>
 #include <thread>
 #include <utility>
 
@@ -206,12 +208,13 @@ Status EventReader::readFrom(Statement& rows, const IdRange& ids, std::size_t li
   rows.bind(1, ids.first).bind(2, ids.last).bind(3, static_cast<std::int64_t>(limit - page.rows.size()));
   int code = rows.step();
   for (; code == SQLITE_ROW; code = rows.step()) {
-    for (int column = 2; column < 6; ++column) {
-      textLeft_ -= static_cast<std::int64_t>(rows.text(column).size());
+    const std::array texts{rows.text(2), rows.text(3), rows.text(4), rows.text(5)};
+    for (const std::string_view text : texts) {
+      textLeft_ -= static_cast<std::int64_t>(text.size());
     }
     if (textLeft_ < 0) return Error{SQLITE_CORRUPT, "its rows say more than it holds"};
-    page.rows.push_back({rows.integer(0), rows.real(1), std::string(rows.text(2)), std::string(rows.text(3)),
-                         std::string(rows.text(4)), std::string(rows.text(5)),
+    page.rows.push_back({rows.integer(0), rows.real(1), std::string(texts[0]), std::string(texts[1]),
+                         std::string(texts[2]), std::string(texts[3]),
                          rows.isNull(6) ? std::nullopt : std::optional(rows.integer(6))});
   }
   if (code != SQLITE_DONE) return lastError();
