@@ -22,8 +22,8 @@ def free_port():
 class Server:
     """Started and killed as often as a test likes; it keeps its port and its directory."""
 
-    def __init__(self, folder, extra="", tls=None):
-        self.port, self.process, self.tls = free_port(), None, tls
+    def __init__(self, folder, extra="", tls=None, login=None):
+        self.port, self.process, self.tls, self.login = free_port(), None, tls, login
         os.makedirs(folder, exist_ok=True)
         self.configuration = os.path.join(folder, "nats.conf")
         self.log = os.path.join(folder, "nats.log")
@@ -51,7 +51,7 @@ class Server:
         raise RuntimeError("nats-server doesn't answer")
 
     def client(self, patience=5):
-        return Client(self.port, self.tls, patience)
+        return Client(self.port, self.tls, patience, self.login)
 
     def end(self, how=signal.SIGKILL):
         if self.process and self.process.poll() is None:
@@ -60,25 +60,29 @@ class Server:
 
 
 class Client:
-    """One connection; a question at a time."""
+    """One connection; a question at a time. `login` makes of the server's INFO what is said to it beside the rest."""
 
-    def __init__(self, port, tls=None, patience=5):
+    def __init__(self, port, tls=None, patience=5, login=None):
         self.socket = socket.create_connection(("127.0.0.1", port), timeout=patience)
         self.input = None
         try:
-            self.greet(tls)
+            self.greet(tls, login)
         except OSError:
             self.close()
             raise
 
-    def greet(self, tls):
-        while (byte := self.socket.recv(1)) != b"\n":  # INFO; what comes after it may be TLS
+    def greet(self, tls, login):
+        info = b""
+        while not info.endswith(b"\n"):  # what comes after it may be TLS
+            byte = self.socket.recv(1)
             if not byte:
                 raise OSError("the server is gone")
+            info += byte
         if tls:
             self.socket = tls.wrap_socket(self.socket, server_hostname="localhost")
         self.input = self.socket.makefile("rb")
-        self.socket.sendall(b'CONNECT {"verbose":false,"headers":true}\r\nSUB answer 1\r\nPING\r\n')
+        about = {"verbose": False, "headers": True, **(login(json.loads(info.partition(b" ")[2])) if login else {})}
+        self.socket.sendall(f"CONNECT {json.dumps(about)}\r\nSUB answer 1\r\nPING\r\n".encode())
         self.line(b"PONG")
 
     def __enter__(self):
