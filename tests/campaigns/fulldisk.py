@@ -6,14 +6,12 @@ Full it is truly where a small file system can be mounted, in a name space of th
 that one too where it can't, come from the interposed calls.
 """
 
-import ctypes
 import os
 import time
 
 from account import Sender, judge, rows_after
+from smalldisk import SmallDisk, fill
 
-NEW_MOUNTS, PRIVATE, RECURSIVE, DETACH = 0x20000, 1 << 18, 1 << 14, 2
-DISK_BYTES = 96 << 20
 FAULTS = {
     "full": (("pwrite", "truncate"), "ENOSPC"),
     "quota": (("pwrite", "truncate"), "EDQUOT"),
@@ -21,35 +19,6 @@ FAULTS = {
     "sync": (("sync",), "EIO"),
     "io": (("pwrite", "truncate", "sync"), "EIO"),
 }
-
-
-class SmallDisk:
-    """A file system in memory that only this program and its children see; `works` tells whether it can be had."""
-
-    libc = ctypes.CDLL(None, use_errno=True)
-
-    def __init__(self):
-        self.works = (self.libc.unshare(NEW_MOUNTS) == 0
-                      and self.libc.mount(None, b"/", None, PRIVATE | RECURSIVE, None) == 0)
-
-    def mount(self, folder):
-        os.makedirs(folder)
-        size = f"size={DISK_BYTES}".encode()
-        self.works = self.works and self.libc.mount(b"tmpfs", folder.encode(), b"tmpfs", 0, size) == 0
-        return self.works
-
-    def unmount(self, folder):
-        self.libc.umount2(folder.encode(), DETACH)
-
-
-def fill(path):
-    with open(path, "wb", buffering=0) as file:
-        for size in (1 << 20, 4096, 1):
-            try:
-                while file.write(bytes(size)) == size:
-                    pass
-            except OSError:
-                continue
 
 
 class Round:

@@ -23,11 +23,14 @@ class Collecting(unittest.TestCase):
     def setUp(self):
         self.folder = tempfile.mkdtemp(prefix="tarncollect")
         self.addCleanup(shutil.rmtree, self.folder, True)
-        self.database = postgres.Database(self.folder)
+        self.database = postgres.Database(self.place_of_database())
         self.database.start()
         self.addCleanup(self.database.end)
         self.configuration = os.path.join(self.folder, "collect.toml")
         self.configure()
+
+    def place_of_database(self):
+        return self.folder
 
     def configure(self, **sections):
         with open(self.configuration, "w", encoding="utf-8") as file:

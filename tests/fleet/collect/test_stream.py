@@ -11,15 +11,18 @@ import unittest
 
 sys.path.insert(0, os.path.dirname(os.path.abspath(__file__)))
 sys.path.insert(0, os.path.dirname(os.path.dirname(os.path.abspath(__file__))))
+sys.path.insert(0, os.path.join(os.path.dirname(os.path.abspath(__file__)), "..", "..", "campaigns"))
 import nats  # noqa: E402
 from collecting import PRODUCER, Collecting  # noqa: E402
+from smalldisk import SmallDisk, fill  # noqa: E402
 
 SEED = int(os.environ.get("TARN_TEST_SEED", "1"))
+DISK_BYTES = 192 << 20
 CONSUMER = "$JS.API.CONSUMER.INFO.TARNREPORTING.collect"
 
 
 @unittest.skipUnless(nats.PROGRAM, "nats-server is not installed here")
-class Stream(Collecting):
+class Streaming(Collecting):
     def setUp(self):
         super().setUp()
         self.server = nats.Server(self.folder)
@@ -79,6 +82,8 @@ class Stream(Collecting):
             time.sleep(0.1)
         self.assertTrue(holds(), self.said())
 
+
+class Stream(Streaming):
     def test_what_was_sent_is_stored_once_by_three_side_by_side(self):
         for _ in range(3):
             self.start()
@@ -215,6 +220,36 @@ class Stream(Collecting):
         self.configure(server={"authority_file": os.path.join(self.folder, "none")})
         self.collect(status=1)
         self.collect("--no-such-option", status=64)
+
+
+class FullDisk(Streaming):
+    """The database's disk has no room for a while."""
+
+    def place_of_database(self):
+        os.chmod(self.folder, 0o755)  # who runs the database is another
+        self.disk = os.path.join(self.folder, "disk")
+        small = SmallDisk()
+        if not small.mount(self.disk, DISK_BYTES):
+            self.skipTest("no file system can be mounted here")
+        self.addCleanup(small.unmount, self.disk)
+        return self.disk
+
+    def test_what_came_meanwhile_is_stored_once_there_is_room_and_nothing_was_acknowledged_before(self):
+        collector = self.start()
+        self.eventually(lambda: self.database.ask("SELECT to_regclass('refused')") == [["refused"]])
+        fill(os.path.join(self.disk, "filler"))
+        truth = self.truth(self.send("--devices", 20, "--ids", 2000, "--seed", SEED))
+        self.eventually(lambda: "No space left on device" in self.said())
+        with nats.Client(self.server.port) as client:
+            state = client.ask(CONSUMER)
+        self.assertGreater(state["num_pending"] + state["num_ack_pending"], 0)
+        os.unlink(os.path.join(self.disk, "filler"))
+        self.assertEqual(self.drain(), (0, 0), self.said())
+        self.assert_even(truth)
+        # Told once, not at every try.
+        self.assertEqual(self.said().count("No space left on device"), 1, self.said())
+        self.assertIn("the database takes it again, after", self.said())
+        self.assertEqual(self.end(collector), 0)
 
 
 if __name__ == "__main__":
