@@ -1,12 +1,11 @@
 // SPDX-License-Identifier: Apache-2.0
-// Measuring: the clock, medians, and how figures are written.
+// Measuring: the clock and medians; how figures are written is in Quantity.h.
 //
 // Machines are noisy, so what is compared takes turns: a round measures ours and each peer once, and the figures are
 // the medians over the rounds.
 #pragma once
 
 #include <cstddef>
-#include <string>
 #include <vector>
 
 namespace tarn::bench {
@@ -38,16 +37,5 @@ template <class Value>
 inline void keep(const Value& value) {
   asm volatile("" : : "r,m"(value) : "memory");
 }
-
-// "7.52 us", "412 ns", "634 k/s", "187 B", "12.4 MB", "797 ms"
-std::string microseconds(double seconds);
-std::string milliseconds(double seconds);
-std::string nanoseconds(double nanoseconds);
-std::string perSecond(double rate);
-std::string bytes(double count);
-std::string megabytes(double count);
-std::string times(double ratio);
-// "9 threads"
-std::string counted(double count, const std::string& what);
 
 }  // namespace tarn::bench

@@ -1,6 +1,7 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "bench/ServiceProcess.h"
 
+#include <fcntl.h>
 #include <signal.h>
 #include <sys/prctl.h>
 #include <sys/resource.h>
@@ -11,6 +12,7 @@
 #include <cstdint>
 #include <cstdlib>
 #include <fstream>
+#include <iostream>
 
 #include "bench/Measure.h"
 #include "client/Socket.h"
@@ -34,7 +36,11 @@ ServiceProcess::ServiceProcess(const Settings& settings, const ServiceSetup& set
 
 ServiceProcess::~ServiceProcess() {
   ::kill(id_, SIGTERM);
-  ::waitpid(id_, nullptr, 0);
+  int status = 0;
+  ::waitpid(id_, &status, 0);
+  if (!WIFEXITED(status) || WEXITSTATUS(status) != EXIT_SUCCESS) {
+    showOutput();
+  }
 }
 
 void ServiceProcess::killAndStart() {
@@ -60,7 +66,7 @@ void ServiceProcess::start() {
   const std::string state = stateDirectory();
   const std::string configuration = directory_.path() + "/config.toml";
   const std::string socket = socketPath();
-  const std::string log = directory_.path() + "/log";
+  const std::string log = logPath();
   id_ = ::fork();
   if (id_ < 0) {
     fail("can't start a process");
@@ -73,9 +79,24 @@ void ServiceProcess::start() {
       ::signal(SIGXFSZ, SIG_IGN);
       ::setrlimit(RLIMIT_FSIZE, &limit);
     }
+    // What it says would stand between the progress of the table.
+    const int output = ::open(outputPath().c_str(), O_WRONLY | O_CREAT | O_APPEND | O_CLOEXEC, 0600);
+    if (output < 0 || ::dup2(output, STDERR_FILENO) < 0) {
+      std::_Exit(126);
+    }
     ::execl(program_.c_str(), program_.c_str(), "--socket", socket.c_str(), "--state-dir", state.c_str(), "--config",
             configuration.c_str(), "--log-level", "error", "--log-target", log.c_str(), nullptr);
     std::_Exit(127);
+  }
+}
+
+void ServiceProcess::showOutput() const {
+  std::cerr << '\n';
+  for (const std::string& file : {outputPath(), logPath()}) {
+    std::ifstream lines(file);
+    for (std::string line; std::getline(lines, line);) {
+      std::cerr << "the service: " << line << '\n';
+    }
   }
 }
 
@@ -85,9 +106,11 @@ void ServiceProcess::waitUntilReady() const {
     const Result<client::Socket> connected = client::Socket::connect(socketPath(), std::chrono::seconds(2));
     if (connected.ok()) return;
     if (::waitpid(id_, nullptr, WNOHANG) != 0) {
+      showOutput();
       fail("the service ended at once");
     }
     if (nowSeconds() > latest) {
+      showOutput();
       fail("the service doesn't answer: " + connected.error.text());
     }
     ::usleep(2000);

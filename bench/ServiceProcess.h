@@ -1,5 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 // ServiceProcess: a tarnreportingd of its own, on a private socket and state directory, ended with the object.
+// What it writes to stderr or its log is shown only when it fails.
 #pragma once
 
 #include <sys/types.h>
@@ -46,6 +47,9 @@ class ServiceProcess {
  private:
   void writeConfiguration(const ServiceSetup& setup) const;
   void start();
+  void showOutput() const;
+  std::string outputPath() const { return directory_.path() + "/stderr"; }
+  std::string logPath() const { return directory_.path() + "/log"; }
   void waitUntilReady() const;
 
   TemporaryDirectory directory_;

@@ -7,13 +7,15 @@
 #include <string>
 #include <vector>
 
+#include "bench/Quantity.h"
+
 namespace tarn::bench {
 
 struct Row {
   std::string figure;
-  std::string ours;
-  std::string peer;    // what was measured beside it in the same run, with its name
-  std::string ratio;   // ours to the peer's
+  Quantity ours;
+  Beside peer;  // what was measured beside it in the same run
+  Ratio ratio;
   std::string target;  // empty: none on this row
   std::optional<bool> met;
 };
@@ -26,10 +28,14 @@ class Table {
     row.met = atLeast ? ours >= target : ours <= target;
     add(std::move(row));
   }
+  const std::vector<Row>& rows() const noexcept { return rows_; }
   void print(std::ostream& out) const;
 
  private:
   std::vector<Row> rows_;
 };
+
+// The first line is the head; each has as many cells as that.
+void printAligned(std::ostream& out, const std::vector<std::vector<std::string>>& lines);
 
 }  // namespace tarn::bench

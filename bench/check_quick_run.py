@@ -1,14 +1,19 @@
 #!/usr/bin/env python3
 # SPDX-License-Identifier: Apache-2.0
-"""Whether a quick run of the benchmark prints the whole table: every row, with its figure and what stands beside it.
+"""Whether a quick run of the benchmark prints the whole table: every row, with its figure and what stands beside it;
+whether its file says the same, and a later run is told beside it.
 
 usage: check_quick_run.py PROGRAM
 No time is looked at: a loaded machine is no defect.
 """
 
+import itertools
+import json
+import os
 import re
 import subprocess
 import sys
+import tempfile
 
 # A row's figure, and the peers that it stands beside ("" for none).
 ROWS = [
@@ -88,20 +93,63 @@ def rows_of(output):
     return [[cell.strip() for cell in line.strip("|").split("|")] for line in lines[2:]]
 
 
+def what_is_wrong_with_file(path, cells):
+    """Each row of the table is in the file, with the number that its text was made of."""
+    with open(path, encoding="utf-8") as file:
+        figures = json.load(file)["figures"]
+    told = [(row["figure"].strip(), row["text"], row.get("peer", ""), row.get("ratio_text", "")) for row in figures]
+    printed = [(row[0], row[1], peer_of(row[2]), row[3]) for row in cells]
+    for told_row, printed_row in itertools.zip_longest(told, printed):
+        if told_row != printed_row:
+            return f"the file says {told_row} and the table {printed_row}"
+    scales = {"ms": 1e-3, "us": 1e-6, "ns": 1e-9, "MB": 1e6, "k/s": 1e3}
+    for row in figures:
+        number, unit = row["text"].split()
+        value = float(number) * scales.get(unit, 1)
+        if abs(value - row["value"]) > max(0.01 * abs(value), 0.6 * scales.get(unit, 1)):
+            return f"{row['text']} was made of {row['value']} {row['unit']}"
+    return None
+
+
+def what_is_wrong_with_comparison(program, path):
+    """A later run beside the file; files that are none are refused before anything is measured."""
+    command = [program, "--quick", "--only", "equality", "--compare"]
+    run = subprocess.run([*command, path], capture_output=True, text=True, timeout=60)
+    table = run.stdout.partition("beside the run of ")[2]
+    rows = [line for line in table.splitlines() if line.startswith("| equality") and "%" in line]
+    if run.returncode != 0 or len(rows) != 2:
+        return f"the comparison is {run.stdout!r} {run.stderr!r}"
+    for bad in (program, path + ".none"):
+        run = subprocess.run([*command, bad], capture_output=True, text=True, timeout=60)
+        if run.returncode != 1 or bad not in run.stderr or "measuring" in run.stderr:
+            return f"compared with {bad}: {run.returncode}, {run.stderr!r}"
+    return None
+
+
+def peer_of(cell):
+    return PEER.match(cell)["name"] if cell else ""
+
+
 def main(program):
-    run = subprocess.run([program, "--quick"], stdout=subprocess.PIPE, text=True, timeout=100)
-    if run.returncode != 0:
-        return f"the benchmark ended with {run.returncode}"
+    with tempfile.TemporaryDirectory() as folder:
+        path = os.path.join(folder, "run.json")
+        run = subprocess.run([program, "--quick", "--json", path], stdout=subprocess.PIPE, text=True, timeout=100)
+        if run.returncode != 0:
+            return f"the benchmark ended with {run.returncode}"
+        return (what_is_wrong_with_table(run) or what_is_wrong_with_file(path, rows_of(run.stdout))
+                or what_is_wrong_with_comparison(program, path))
+
+
+def what_is_wrong_with_table(run):
     seen = set()
     for cells in rows_of(run.stdout):
         if len(cells) != 6 or not FIGURE.match(cells[1]):
             return f"a row without a figure: {cells}"
-        peer = PEER.match(cells[2])
-        if cells[2] and not peer:
+        if cells[2] and not PEER.match(cells[2]):
             return f"a row with a peer that was not measured: {cells}"
         if bool(cells[4]) != bool(cells[5]):
             return f"a row with a target that is not judged, or the other way round: {cells}"
-        seen.add((cells[0], peer["name"] if peer else ""))
+        seen.add((cells[0], peer_of(cells[2])))
     missing = [(figure, peer) for figure, peers in ROWS for peer in peers if (figure, peer) not in seen]
     return f"rows are missing: {missing}\n{run.stdout}" if missing else None
 

@@ -55,7 +55,7 @@ void measureGrowth(const Settings& settings, Table& table) {
     }
   }
   const double first = median(samples.front());
-  table.add({nameOf(lengths.front()), nanoseconds(first), "", "", "", {}});
+  table.add({nameOf(lengths.front()), nanoseconds(first), {}, {}, "", {}});
   for (std::size_t i = 1; i < lengths.size(); ++i) {
     const double ours = median(samples[i]);
     table.addWithTarget({nameOf(lengths[i]),

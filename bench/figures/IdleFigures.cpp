@@ -51,10 +51,6 @@ std::vector<double> watch(const Settings& settings, pid_t service) {
   return {(sleeps(service) - services) / seconds, (sleeps(::getpid(), ::gettid()) - own) / seconds};
 }
 
-std::string aSecond(double rate) {
-  return std::to_string(rate).substr(0, 4) + " /s";
-}
-
 }  // namespace
 
 void measureIdle(const Settings& settings, Table& table) {
@@ -75,11 +71,11 @@ void measureIdle(const Settings& settings, Table& table) {
   table.addWithTarget({"wake-ups a second with 50 quiet rings, service",
                        aSecond(with[0]),
                        "without rings " + aSecond(without),
-                       "",
+                       {},
                        "<= 0",
                        {}},
                       with[0], 0);
-  table.addWithTarget({"wake-ups a second with 50 quiet rings, library", aSecond(with[1]), "", "", "<= 0", {}}, with[1],
+  table.addWithTarget({"wake-ups a second with 50 quiet rings, library", aSecond(with[1]), {}, {}, "<= 0", {}}, with[1],
                       0);
 }
 

@@ -213,7 +213,7 @@ void measureMirror(const Settings& settings, Table& table) {
     threads.push_back(live[0]);
     sessions.push_back(live[1]);
   }
-  table.addWithTarget({"mirror, hand-over of a message", nanoseconds(median(handOvers)), "", "", "<= 300 ns", {}},
+  table.addWithTarget({"mirror, hand-over of a message", nanoseconds(median(handOvers)), {}, {}, "<= 300 ns", {}},
                       median(handOvers), kHandOverTarget);
   table.add({"mirror, stop of a long session",
              microseconds(median(stops)),
@@ -221,9 +221,9 @@ void measureMirror(const Settings& settings, Table& table) {
              times(median(stops) / median(plainStops)),
              "",
              {}});
-  table.add({"mirror, stop until its summary event is sent", microseconds(median(summaries)), "", "", "", {}});
-  table.add({"threads of the service, 1000 live sessions", counted(median(threads), "threads"), "", "", "", {}});
-  table.add({"resident bytes a live session", bytes(median(sessions)), "", "", "", {}});
+  table.add({"mirror, stop until its summary event is sent", microseconds(median(summaries)), {}, {}, "", {}});
+  table.add({"threads of the service, 1000 live sessions", counted(median(threads), "threads"), {}, {}, "", {}});
+  table.add({"resident bytes a live session", bytes(median(sessions)), {}, {}, "", {}});
 }
 
 }  // namespace tarn::bench

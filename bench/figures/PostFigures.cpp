@@ -302,7 +302,7 @@ void addPart(const std::vector<Round>& rounds, std::size_t part, const char* nam
                {}});
   }
   const double clock = medianOf(rounds, [&](const Round& round) { return round.clock[part]; });
-  table.add({std::string("the clock around each of them, ") + name, nanoseconds(clock), "", "", "", {}});
+  table.add({std::string("the clock around each of them, ") + name, nanoseconds(clock), {}, {}, "", {}});
 }
 
 }  // namespace
@@ -329,24 +329,24 @@ void measurePost(const Settings& settings, Table& table) {
   const double worst = worstOfAll(settings, service);
   table.addWithTarget({"post of a message, service alive, worst of " + std::to_string(settings.count(kAllPosts)),
                        nanoseconds(worst),
-                       "",
-                       "",
+                       {},
+                       {},
                        "<= 20 us",
                        {}},
                       worst, kWorstTarget);
   const double rate = medianOf(rounds, [](const Round& round) { return round.rate; });
-  table.addWithTarget({"messages through a ring, nothing wanted", perSecond(rate), "", "", ">= 1.2 M/s", {}}, rate,
+  table.addWithTarget({"messages through a ring, nothing wanted", perSecond(rate), {}, {}, ">= 1.2 M/s", {}}, rate,
                       kRateTarget, true);
   const double processor = medianOf(rounds, [](const Round& round) { return round.processor; });
   table.addWithTarget(
-      {"processor time a message through a ring, nothing wanted", microseconds(processor), "", "", "<= 0.7 us", {}},
+      {"processor time a message through a ring, nothing wanted", microseconds(processor), {}, {}, "<= 0.7 us", {}},
       processor, kProcessorTarget);
   const double recorded = medianOf(rounds, [](const Round& round) { return round.recorded[0]; });
   table.addWithTarget(
-      {"messages through a ring, both events recorded, until committed", perSecond(recorded), "", "", ">= 200 k/s", {}},
+      {"messages through a ring, both events recorded, until committed", perSecond(recorded), {}, {}, ">= 200 k/s", {}},
       recorded, kRecordedRateTarget, true);
   const double spent = medianOf(rounds, [](const Round& round) { return round.recorded[1]; });
-  table.add({"processor time a message through a ring, both events recorded", microseconds(spent), "", "", "", {}});
+  table.add({"processor time a message through a ring, both events recorded", microseconds(spent), {}, {}, "", {}});
 }
 
 }  // namespace tarn::bench

@@ -121,7 +121,7 @@ void measureQueries(const Settings& settings, Table& table) {
       samples.push_back(store.ask(query));
     }
     const double took = median(samples);
-    table.addWithTarget({what, milliseconds(took), "", "", "<= 20 ms", {}}, took, kTarget);
+    table.addWithTarget({what, milliseconds(took), {}, {}, "<= 20 ms", {}}, took, kTarget);
   };
   recorder::EventQuery time;
   time.since = store.middle();
@@ -140,9 +140,9 @@ void measureQueries(const Settings& settings, Table& table) {
     }
     const double took = median(samples);
     if (isJudged) {
-      table.addWithTarget({what, milliseconds(took), "", "", "<= 20 ms", {}}, took, kTarget);
+      table.addWithTarget({what, milliseconds(took), {}, {}, "<= 20 ms", {}}, took, kTarget);
     } else {
-      table.add({what, milliseconds(took), "", "", "", {}});
+      table.add({what, milliseconds(took), {}, {}, "", {}});
     }
   };
   measurePlain("  in SQL alone: a session", "session = " + std::to_string(store.middleSession()), true);

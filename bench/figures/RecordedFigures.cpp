@@ -66,7 +66,7 @@ void measureRecorded(const Settings& settings, Table& table) {
     limits.push_back(static_cast<double>(count) / (nowSeconds() - start));
   }
   const double limit = median(limits);
-  const std::string beside = "SQLite alone " + perSecond(limit) + " (of two rows)";
+  const Beside beside = "SQLite alone " + perSecond(limit) + " (of two rows)";
   table.addWithTarget({"both events recorded, until committed",
                        perSecond(all.rate()),
                        beside,
@@ -81,7 +81,7 @@ void measureRecorded(const Settings& settings, Table& table) {
              "",
              {}});
   table.addWithTarget(
-      {"processor time a message, both events recorded", microseconds(all.processor()), "", "", "<= 10 us", {}},
+      {"processor time a message, both events recorded", microseconds(all.processor()), {}, {}, "<= 10 us", {}},
       all.processor(), kProcessorTarget);
   const double ofTwoRows = sqlite.bytesAMessage();
   table.addWithTarget({"file a message, both events recorded",
@@ -91,7 +91,7 @@ void measureRecorded(const Settings& settings, Table& table) {
                        "<= 0.55 of two rows",
                        {}},
                       all.bytesAMessage(), kFileTarget * ofTwoRows);
-  table.add({"processor time a message, old ones expiring", microseconds(retaining.processor()), "", "", "", {}});
+  table.add({"processor time a message, old ones expiring", microseconds(retaining.processor()), {}, {}, "", {}});
 }
 
 }  // namespace tarn::bench

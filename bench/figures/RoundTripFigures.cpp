@@ -16,7 +16,7 @@ constexpr double kMedianTarget = 7.5e-6;
 constexpr double kTailTarget = 15e-6;
 constexpr double kPlacedTarget = 1.15;
 
-// The medians over the rounds of each round's median and 99th percentile.
+// Each round's median and 99th percentile.
 class Trips {
  public:
   explicit Trips(Receiver& receiver) : receiver_(receiver) {}
@@ -33,8 +33,9 @@ class Trips {
     medians_.push_back(percentile(samples, 0.5));
     tails_.push_back(percentile(std::move(samples), 0.99));
   }
-  double middle() const { return median(medians_); }
-  double tail() const { return median(tails_); }
+  // A sample of each round.
+  const Samples& medians() const { return medians_; }
+  const Samples& tails() const { return tails_; }
 
  private:
   Receiver& receiver_;
@@ -43,8 +44,8 @@ class Trips {
 };
 
 struct Results {
-  double middle;
-  double tail;
+  Samples middle;
+  Samples tail;
 };
 
 struct AllResults {
@@ -70,7 +71,14 @@ AllResults measureAll(const Settings& settings) {
     }
     service.forget();
   }
-  return {{ours.middle(), ours.tail()}, {bareTrips.middle(), bareTrips.tail()}, {busTrips.middle(), busTrips.tail()}};
+  return {
+      {ours.medians(), ours.tails()}, {bareTrips.medians(), bareTrips.tails()}, {busTrips.medians(), busTrips.tails()}};
+}
+
+Row rowOf(const std::string& figure, const std::string& peer, const Samples& ours, const Samples& theirs) {
+  return {
+      figure, microseconds(median(ours)), peer + " " + microseconds(median(theirs)), timesOfRounds(ours, theirs), "",
+      {}};
 }
 
 }  // namespace
@@ -78,34 +86,24 @@ AllResults measureAll(const Settings& settings) {
 void measureRoundTripOnOneProcessor(const Settings& settings, Table& table) {
   const OneProcessor one;
   const AllResults all = measureAll(settings);
-  const auto row = [&](const std::string& part, const std::string& peer, double ours, double theirs) {
-    return Row{"round trip, one processor, " + part,
-               microseconds(ours),
-               peer + " " + microseconds(theirs),
-               times(ours / theirs),
-               "",
-               {}};
+  const auto row = [](const std::string& part, const std::string& peer, const Samples& ours, const Samples& theirs) {
+    return rowOf("round trip, one processor, " + part, peer, ours, theirs);
   };
   Row middle = row("median", "bare", all.ours.middle, all.bare.middle);
   middle.target = "<= 7.5 us";
-  table.addWithTarget(middle, all.ours.middle, kMedianTarget);
+  table.addWithTarget(middle, median(all.ours.middle), kMedianTarget);
   table.add(row("median", "sd-bus", all.ours.middle, all.bus.middle));
   Row tail = row("p99", "bare", all.ours.tail, all.bare.tail);
   tail.target = "<= 15 us";
-  table.addWithTarget(tail, all.ours.tail, kTailTarget);
+  table.addWithTarget(tail, median(all.ours.tail), kTailTarget);
   table.add(row("p99", "sd-bus", all.ours.tail, all.bus.tail));
 }
 
 void measureRoundTrip(const Settings& settings, Table& table) {
   const AllResults all = measureAll(settings);
-  const double ratio = all.ours.middle / all.bare.middle;
-  const auto row = [](const std::string& part, const std::string& peer, double ours, double theirs) {
-    return Row{"round trip, placed freely, " + part,
-               microseconds(ours),
-               peer + " " + microseconds(theirs),
-               times(ours / theirs),
-               "",
-               {}};
+  const double ratio = median(all.ours.middle) / median(all.bare.middle);
+  const auto row = [](const std::string& part, const std::string& peer, const Samples& ours, const Samples& theirs) {
+    return rowOf("round trip, placed freely, " + part, peer, ours, theirs);
   };
   Row middle = row("median", "bare", all.ours.middle, all.bare.middle);
   middle.target = "<= 1.15 x bare";

@@ -93,7 +93,7 @@ void measureSignposts(const Settings& settings, Table& table) {
   const auto row = [&](const char* name, Sample ours, const char* peer, Sample theirs) {
     table.add({name,
                nanoseconds(figure(ours)),
-               peer + (" " + nanoseconds(figure(theirs))),
+               peer + nanoseconds(figure(theirs)),
                times(figure(ours) / figure(theirs)),
                "",
                {}});

@@ -36,6 +36,8 @@ class Flow {
   }
   double rate() const { return median(rates_); }
   double processor() const { return median(processor_); }
+  const Samples& rates() const { return rates_; }
+  const Samples& processors() const { return processor_; }
 
  private:
   Receiver& receiver_;
@@ -46,7 +48,11 @@ class Flow {
 };
 
 Row rateRow(const std::string& figure, const std::string& peer, const Flow& ours, const Flow& theirs) {
-  return {figure, perSecond(ours.rate()), peer + " " + perSecond(theirs.rate()), times(ours.rate() / theirs.rate()), "",
+  return {figure,
+          perSecond(ours.rate()),
+          peer + " " + perSecond(theirs.rate()),
+          timesOfRounds(ours.rates(), theirs.rates()),
+          "",
           {}};
 }
 
@@ -54,7 +60,7 @@ Row processorRow(const std::string& figure, const std::string& peer, const Flow&
   return {figure,
           microseconds(ours.processor()),
           peer + " " + microseconds(theirs.processor()),
-          times(ours.processor() / theirs.processor()),
+          timesOfRounds(ours.processors(), theirs.processors()),
           "",
           {}};
 }

@@ -184,7 +184,7 @@ class Tool {
     }
     const double median = bench::median(took);
     table.addWithTarget(
-        {what, milliseconds(median), "processor time " + milliseconds(bench::median(processor)), "", targetText, {}},
+        {what, milliseconds(median), "processor time " + milliseconds(bench::median(processor)), {}, targetText, {}},
         median, target);
   }
 
@@ -202,7 +202,7 @@ void measureTools(const Settings& settings, Table& table) {
     const Tool tool(settings, store);
     tool.measure("report over 1000 sessions and 10^6 events", {"report"}, "<= 3 s", kReportTarget, table);
     const auto size = static_cast<double>(std::filesystem::file_size(tool.outputFile()));
-    table.addWithTarget({"page of that report", megabytes(size), "", "", "<= 1 MiB", {}}, size, kPageTarget);
+    table.addWithTarget({"page of that report", megabytes(size), {}, {}, "<= 1 MiB", {}}, size, kPageTarget);
   }
   const SessionStore store(settings, 0, settings.quick ? 4 : kMegabytes);
   const Tool tool(settings, store);

@@ -125,7 +125,7 @@ void measureTrace(const Settings& settings, Table& table) {
   table.addWithTarget({"evaluation of a trace, processor time",
                        milliseconds(median(processor)),
                        "by the clock " + milliseconds(median(clock)),
-                       "",
+                       {},
                        "<= 1 s",
                        {}},
                       median(processor), kTarget);
