@@ -48,6 +48,7 @@ Settings settingsOf(CollectConfiguration& configuration) {
           {"server", "consumer", takeText(configuration.consumer)},
           {"server", "max_unacknowledged", takeWhole(configuration.mostUnacknowledged, 1, 1'000'000)},
           {"server", "answer_seconds", takeWhole(configuration.answerSeconds, 1, 600)},
+          {"server", "again_seconds", takeWhole(configuration.againSeconds, 0, 86'400)},
           {"server", "credentials_file", takeText(server.credentialsFile)},
           {"server", "authority_file", takeText(server.authorityFile)},
           {"server", "certificate_file", takeText(server.certificateFile)},

@@ -49,6 +49,7 @@ struct CollectConfiguration {
   std::string consumer = "collect";  // all collectors of a database have the same
   std::int64_t mostUnacknowledged = 4096;
   std::int64_t answerSeconds = 30;  // a message that isn't acknowledged within it goes to another collector
+  std::int64_t againSeconds = 30;   // between two looks for what the database lacks; 0: it isn't looked for
   std::string database = "dbname=tarnreporting";
   std::int64_t groupMessages = 64;
   std::int64_t retentionDays = 0;  // 0: nothing is dropped

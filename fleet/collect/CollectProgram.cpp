@@ -7,6 +7,7 @@
 #include <random>
 #include <utility>
 
+#include "fleet/collect/Inquiry.h"
 #include "fleet/collect/JetStreamSource.h"
 #include "fleet/collect/Schema.h"
 #include "fleet/publish/Backoff.h"
@@ -98,6 +99,7 @@ class Program {
     while (!ctl::isStopRequested()) {
       if (!keepDatabase()) continue;
       forgetWhenDue();
+      askWhenDue(source);
       const Status fetched = source.fetch(kWait);
       servers_.note(fetched);
       if (!pace(fetched, serverBackoff_)) continue;
@@ -174,6 +176,7 @@ class Program {
       databases_.note(group.error);
       if (group.ok()) {
         take(group.value, source.messages());
+        inquiry_.note(group.value.written.devices);
         source.acknowledge(group.value.refused);
       }
       if (pace(group.error, databaseBackoff_)) return;
@@ -214,17 +217,39 @@ class Program {
     }
   }
 
+  // Devices for what the database lacks of them.
+  void askWhenDue(JetStreamSource& source) {
+    if (configuration_.againSeconds == 0 || options_.once || Clock::now() < nextLook_) return;
+    nextLook_ = Clock::now() + std::chrono::seconds(configuration_.againSeconds);
+    const Result<std::vector<LackedIds>> lacked = inquiry_.look();
+    databases_.note(lacked.error);
+    std::int64_t count = 0;
+    for (const LackedIds& each : lacked.value) {
+      if (Status asked = source.ask(each.device, each.ranges); asked.failed()) {
+        servers_.note(asked);
+        return;
+      }
+      count += recorder::countOf(each.ranges);
+    }
+    if (count > 0) {
+      log_.write(LogLevel::Default, "asked for " + std::to_string(count) + " ids again, of " +
+                                        std::to_string(lacked.value.size()) + " devices");
+    }
+  }
+
   const CollectOptions& options_;
   const CollectConfiguration& configuration_;
   const ProgramLog log_;
   Database database_;
   Collector collector_{database_};
+  Inquiry inquiry_{database_};
   WrittenGroup counts_;
   Backoff serverBackoff_{std::random_device()()};
   Backoff databaseBackoff_{std::random_device()()};
   Journal servers_{log_, "the server answers again"};
   Journal databases_{log_, "the database takes it again"};
   Clock::time_point nextRetention_{};
+  Clock::time_point nextLook_{};
 };
 
 }  // namespace

@@ -18,6 +18,7 @@ std::string clean(const std::string& text) {
 void add(const WrittenGroup& written, WrittenGroup& all) {
   all.events += written.events;
   all.records += written.records;
+  all.devices.insert(all.devices.end(), written.devices.begin(), written.devices.end());
 }
 
 }  // namespace

@@ -186,6 +186,25 @@ CopyRows GroupRows::told() const {
   return rows;
 }
 
+CopyRows GroupRows::places() const {
+  CopyRows rows;
+  for (std::size_t i = 0; i < batches_.size(); ++i) {
+    if (batches_[i]->last() >= batches_[i]->first()) continue;
+    rows.begin(2);
+    rows.integer(devices_.at(names_[i]));
+    rows.number(batches_[i]->last());
+  }
+  return rows;
+}
+
+std::vector<std::int32_t> GroupRows::devices() const {
+  std::vector<std::int32_t> numbers;
+  for (const auto& [name, number] : devices_) {
+    numbers.push_back(number);
+  }
+  return numbers;
+}
+
 std::vector<std::string> GroupRows::days() const {
   std::set<std::int64_t> days;
   for (const v1::Batch* const batch : batches_) {

@@ -44,6 +44,10 @@ class GroupRows {
   CopyRows gaps() const;
   // device, first, last, left_out
   CopyRows told() const;
+  // How far devices said that they are, with nothing to tell.
+  CopyRows places() const;
+  // The database's numbers of the devices.
+  std::vector<std::int32_t> devices() const;
   // The days of the events, each once, as 2026-11-20.
   std::vector<std::string> days() const;
 

@@ -28,7 +28,8 @@ CREATE TEMPORARY TABLE IF NOT EXISTS side_periods(run bigint, id bigint, session
   ON COMMIT DELETE ROWS;
 CREATE TEMPORARY TABLE IF NOT EXISTS side_gaps(device integer, first bigint, last bigint) ON COMMIT DELETE ROWS;
 CREATE TEMPORARY TABLE IF NOT EXISTS side_told(device integer, first bigint, last bigint, left_out text)
-  ON COMMIT DELETE ROWS)";
+  ON COMMIT DELETE ROWS;
+CREATE TEMPORARY TABLE IF NOT EXISTS side_places(device integer, made bigint) ON COMMIT DELETE ROWS)";
 
 // The first number that no other connection has; the last one is shared by all that come later.
 constexpr const char* kKeeper =
@@ -104,6 +105,13 @@ INSERT INTO told AS t SELECT device, first, last, coalesce(range_agg(r) FILTER (
   GROUP BY device, first, last ORDER BY 1, 2, 3
 ON CONFLICT (device, first, last) DO UPDATE SET left_out = t.left_out + excluded.left_out
   WHERE t.left_out <> excluded.left_out)";
+
+// In the devices' order, as others do it too.
+constexpr const char* kAddPlaces = R"(
+UPDATE devices AS d SET made = p.made FROM (
+    SELECT id, max(s.made) AS made FROM devices JOIN side_places AS s ON s.device = id WHERE devices.made < s.made
+    GROUP BY id ORDER BY id) AS p
+  WHERE d.id = p.id AND d.made < p.made)";
 
 constexpr const char* kAddStates = R"(
 INSERT INTO periods AS p SELECT DISTINCT ON (run, id) run, id, session, device, started, stopped, messages, redundant,
@@ -183,6 +191,7 @@ Status GroupWriter::fillAll(const GroupRows& rows) {
   if (Status filled = fill("side_periods", rows.periods()); filled.failed()) return filled;
   if (Status filled = fill("side_gaps", rows.gaps()); filled.failed()) return filled;
   if (Status filled = fill("side_told", rows.told()); filled.failed()) return filled;
+  if (Status filled = fill("side_places", rows.places()); filled.failed()) return filled;
   return fill("side_events", rows.events());
 }
 
@@ -210,8 +219,12 @@ Result<WrittenGroup> GroupWriter::writeOnce(GroupRows& rows) {
   if (failed(learnDevices(rows)) || failed(learnRuns(rows)) || failed(makeDays(days))) return written;
   if (failed(database_.run("BEGIN")) || failed(fillAll(rows))) return written;
   const Result<std::int64_t> events = addEvents(days);
-  if (failed(events.error) || failed(database_.run(kAddTold)) || failed(database_.run(kAddStates))) return written;
+  if (failed(events.error) || failed(database_.run(kAddTold)) || failed(database_.run(kAddPlaces)) ||
+      failed(database_.run(kAddStates))) {
+    return written;
+  }
   written.value.events = events.value;
+  written.value.devices = rows.devices();
   failed(database_.run("COMMIT"));
   return written;
 }

@@ -20,8 +20,9 @@
 namespace tarn::fleet {
 
 struct WrittenGroup {
-  std::int64_t events = 0;   // those that weren't there before
-  std::int64_t records = 0;  // in all
+  std::int64_t events = 0;            // those that weren't there before
+  std::int64_t records = 0;           // in all
+  std::vector<std::int32_t> devices;  // the database's numbers of those that they are of
 };
 
 class GroupWriter {

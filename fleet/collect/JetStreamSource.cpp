@@ -3,6 +3,8 @@
 
 #include <utility>
 
+#include "fleet/format/Again.h"
+
 namespace tarn::fleet {
 
 namespace {
@@ -121,6 +123,14 @@ void JetStreamSource::giveBack() {
   }
   natsConnection_FlushTimeout(connection_.get(), kFlushMilliseconds);
   letGo();
+}
+
+Status JetStreamSource::ask(const std::string& device, const std::vector<recorder::IdRange>& ranges) {
+  const std::string subject = againSubject(configuration_.server.subject, device);
+  const std::string bytes = packAgain(ranges);
+  const natsStatus status =
+      natsConnection_Publish(connection_.get(), subject.c_str(), bytes.data(), static_cast<int>(bytes.size()));
+  return status == NATS_OK ? Status() : Status(natsError(subject, status));
 }
 
 void JetStreamSource::letGo() {

@@ -9,11 +9,13 @@
 #pragma once
 
 #include <chrono>
+#include <string>
 #include <vector>
 
 #include "fleet/collect/CollectOptions.h"
 #include "fleet/collect/Collector.h"
 #include "fleet/publish/NatsConnection.h"
+#include "recorder/store/retention/IdRange.h"
 
 namespace tarn::fleet {
 
@@ -33,6 +35,8 @@ class JetStreamSource {
   // Those at `refused` aren't to come again, whatever becomes of them.
   void acknowledge(const std::vector<Refusal>& refused);
   void giveBack();
+  // Asks a device for ids again, if it hears it. The error: it couldn't be said.
+  [[nodiscard]] Status ask(const std::string& device, const std::vector<recorder::IdRange>& ranges);
 
  private:
   [[nodiscard]] Status join();

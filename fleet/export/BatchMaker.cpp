@@ -59,6 +59,21 @@ Result<MadeBatch> BatchMaker::make(const std::vector<recorder::EventRow>& rows, 
   return {std::move(made_), {}};
 }
 
+Result<MadeBatch> BatchMaker::makeAgain(const std::vector<recorder::EventRow>& rows, recorder::IdRange ids,
+                                        bool isWhole, std::int64_t lookedAt, StoredSessions& sessions) {
+  told_.clear();
+  Result<MadeBatch> made = make(rows, ids.first - 1, lookedAt, sessions);
+  v1::Batch& batch = made.value.batch;
+  const bool hasAll = rows.empty() || batch.last() == rows.back().id;
+  if (made.ok() && isWhole && hasAll && batch.last() < ids.last) {
+    v1::Gap& gap = *batch.add_gaps();
+    gap.set_first(batch.last() + 1);
+    gap.set_last(ids.last);
+    batch.set_last(ids.last);
+  }
+  return made;
+}
+
 Result<MadeBatch> BatchMaker::makeOfSessions(const std::vector<std::int64_t>& ids, std::int64_t after,
                                              std::int64_t lookedAt, StoredSessions& sessions) {
   begin(after, lookedAt);

@@ -43,7 +43,11 @@ class BatchMaker {
   // one's id is the batch's last. `lookedAt`: microseconds. The error is that of `sessions`.
   Result<MadeBatch> make(const std::vector<recorder::EventRow>& rows, std::int64_t after, std::int64_t lookedAt,
                          StoredSessions& sessions);
-  // One of sessions alone; those that aren't there any more are passed over.
+  // The same of ids that were told of before, up to `last` at the most: what has no row among them is gone. `rows` are
+  // all that there are up to `last`, or the first of them where `isWhole` is false. Of their sessions all is told.
+  Result<MadeBatch> makeAgain(const std::vector<recorder::EventRow>& rows, recorder::IdRange ids, bool isWhole,
+                              std::int64_t lookedAt, StoredSessions& sessions);
+  // One of sessions alone; those that aren't there any more are passed over. Of none it says how far the device is.
   Result<MadeBatch> makeOfSessions(const std::vector<std::int64_t>& ids, std::int64_t after, std::int64_t lookedAt,
                                    StoredSessions& sessions);
 

@@ -69,6 +69,7 @@ Settings settingsOf(ExportConfiguration& configuration) {
           {"server", "urls", takeServers(server.urls)},
           {"server", "subject", takeText(server.subject)},
           {"server", "answer_seconds", takeWhole(server.answerSeconds, 1, 600)},
+          {"server", "longest_pause_seconds", takeWhole(server.longestPauseSeconds, 1, 3600)},
           {"server", "credentials_file", takeText(server.credentialsFile)},
           {"server", "authority_file", takeText(server.authorityFile)},
           {"server", "certificate_file", takeText(server.certificateFile)},

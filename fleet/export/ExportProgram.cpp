@@ -66,6 +66,12 @@ WindowLimits limitsOf(const ServerSettings& settings) {
   return limits;
 }
 
+BackoffLimits pausesOf(const ServerSettings& settings) {
+  BackoffLimits limits;
+  limits.most = std::chrono::seconds(settings.longestPauseSeconds);
+  return limits;
+}
+
 class Program {
  public:
   Program(const ExportOptions& options, const ExportConfiguration& configuration, const FleetKey& key,
@@ -76,7 +82,8 @@ class Program {
         sieve_(configuration.rules, key),
         cursor_(options.ownDirectory + "/cursor"),
         arrived_(options.ownDirectory + "/arrived"),
-        window_(publisher, Backoff(std::random_device()()), limitsOf(configuration.server)),
+        window_(publisher, Backoff(std::random_device()(), pausesOf(configuration.server)),
+                limitsOf(configuration.server)),
         exporter_(store_, sieve_, device, cursor_, arrived_, window_, publisher) {}
 
   int run() {
@@ -93,6 +100,7 @@ class Program {
       const Status status = exporter_.step(clockNow(), kWait);
       health_.note(status);
       health_.note(exporter_, window_, clockNow());
+      tellAsked();
       if (status.failed()) {
         if (options_.once) return kExitFailure;
         ctl::pauseUnlessStopped(std::chrono::duration<double>(kSecondsAfterFault));
@@ -106,6 +114,11 @@ class Program {
   }
 
  private:
+  void tellAsked() {
+    if (exporter_.askedAgain() == toldAsked_) return;
+    log_.write(LogLevel::Default, std::to_string(exporter_.askedAgain() - toldAsked_) + " ids were asked for again");
+    toldAsked_ = exporter_.askedAgain();
+  }
   // What is on its way may arrive; it would be sent again otherwise.
   void finish() {
     const auto until = monotonicNow() + kLastWait;
@@ -125,6 +138,7 @@ class Program {
   Exporter exporter_;
   linux_host::ServiceManager manager_;
   Health health_{log_, manager_, options_.ownDirectory};
+  std::int64_t toldAsked_ = 0;
 };
 
 }  // namespace

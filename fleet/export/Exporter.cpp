@@ -17,6 +17,10 @@ constexpr std::chrono::seconds kBetweenLooks{10};
 constexpr std::chrono::milliseconds kBetweenWrites{100};
 // The oldest are let go of: their end isn't told then unless they say something more.
 constexpr std::size_t kMostOpen = 4096;
+// What is asked for meanwhile is answered together: several ask for the same.
+constexpr std::chrono::seconds kBetweenAnswers{10};
+// After so long without anything new it says how far it is.
+constexpr std::chrono::seconds kQuiet{30};
 
 // Whether there is something to tell of the session that wasn't.
 bool isNews(const StoredSession& stored) {
@@ -70,6 +74,14 @@ Status Exporter::fill(const ExportClock& now) {
   if (status.ok() && isAtTheEnd_ && window_.hasRoom() && now.monotonic >= nextLook_) {
     nextLook_ = now.monotonic + kBetweenLooks;
     status = lookAtOpen(now);
+  }
+  // A page at a time, so that what is new isn't held up.
+  if (status.ok() && window_.hasRoom()) {
+    takeAsked(now);
+    status = answer(now);
+  }
+  if (status.ok()) {
+    status = tellPlace(now);
   }
   store_.rest();
   return status;
@@ -139,6 +151,61 @@ Status Exporter::lookAtOpen(const ExportClock& now) {
   std::vector<std::int64_t> left;
   std::set_difference(next_.open.begin(), next_.open.end(), news.begin(), news.end(), std::back_inserter(left));
   next_.open = std::move(left);
+  return add(std::move(made.value));
+}
+
+void Exporter::takeAsked(const ExportClock& now) {
+  if (!asked_.empty() || now.monotonic < nextAsked_) return;
+  nextAsked_ = now.monotonic + kBetweenAnswers;
+  std::vector<recorder::IdRange> asked;
+  publisher_.asked(asked);
+  std::sort(asked.begin(), asked.end(), [](const auto& one, const auto& other) { return one.first < other.first; });
+  for (const recorder::IdRange& range : asked) {
+    // What is beyond comes by itself.
+    if (range.first >= 1 && range.first <= next_.event) {
+      recorder::addRange(asked_, {range.first, std::min(range.last, next_.event)});
+    }
+  }
+  askedAgain_ += recorder::countOf(asked_);
+}
+
+Status Exporter::answer(const ExportClock& now) {
+  if (asked_.empty()) return {};
+  recorder::IdRange& ids = asked_.front();
+  Result<recorder::EventPage> page = store_.readEarlier(ids.first - 1, kRowsAtOnce);
+  if (page.failed()) return page.error;
+  std::vector<recorder::EventRow>& rows = page.value.rows;
+  if (page.value.missing || page.value.lookedUpTo < ids.first) {
+    asked_.clear();  // another store, which has none of them
+    return {};
+  }
+  if (Status looked = store_.look(); looked.failed()) return looked;
+  std::erase_if(rows, [&ids](const recorder::EventRow& row) { return row.id < ids.first || row.id > ids.last; });
+  Result<MadeBatch> made = maker_.makeAgain(rows, ids, page.value.lookedUpTo >= ids.last, lookedAt(now), store_);
+  if (made.failed()) return made.error;
+  // Under a name of its own: who lost the message may still know its name, and drop it as one that comes twice.
+  Result<PackedMessage> message = packer_.pack(made.value.batch);
+  if (message.failed()) return message.error;
+  window_.add(message.value.id + "." + std::to_string(next_.lookedAt), std::move(message.value.bytes), next_);
+  ids.first = made.value.batch.last() + 1;
+  if (ids.first > ids.last) {
+    asked_.erase(asked_.begin());
+  }
+  return {};
+}
+
+Status Exporter::tellPlace(const ExportClock& now) {
+  if (!isAtTheEnd() || settled_) {
+    quietSince_.reset();
+    return {};
+  }
+  if (!quietSince_) {
+    quietSince_ = now.monotonic;
+  }
+  if (now.monotonic - *quietSince_ < kQuiet || next_.event == toldPlace_) return {};
+  Result<MadeBatch> made = maker_.makeOfSessions({}, next_.event, lookedAt(now), store_);
+  if (made.failed()) return made.error;
+  toldPlace_ = next_.event;
   return add(std::move(made.value));
 }
 

@@ -4,6 +4,7 @@
 #include <unordered_map>
 #include <utility>
 
+#include "fleet/format/Again.h"
 #include "plist/ThreadSafety.h"
 
 namespace tarn::fleet {
@@ -14,6 +15,10 @@ constexpr std::int64_t kMilliseconds = 1000;
 constexpr std::int64_t kMostPending = 4096;
 // For the library's threads to end.
 constexpr std::int64_t kCloseMilliseconds = 5000;
+// Between two tries to connect when nothing is to be published.
+constexpr std::chrono::minutes kBetweenTries{1};
+// What is beyond will be asked for another time.
+constexpr std::size_t kMostAsked = 4 * kMostRanges;
 
 }  // namespace
 
@@ -41,6 +46,18 @@ class JetStreamPublisher::Answers {
     }
     numbers_.clear();
   }
+  void takeAsked(std::vector<recorder::IdRange>& ranges) {
+    const MutexLock lock(mutex_);
+    ranges.insert(ranges.end(), asked_.begin(), asked_.end());
+    asked_.clear();
+  }
+  // One of the library's threads: somebody asks. What can't be read is nobody's who could be told.
+  static void heard(natsConnection*, natsSubscription*, natsMsg* message, void* answers) {
+    const NatsOwned<natsMsg> owned(message);
+    const auto ranges =
+        unpackAgain({natsMsg_GetData(message), static_cast<std::size_t>(natsMsg_GetDataLength(message))});
+    static_cast<Answers*>(answers)->ask(ranges.value);
+  }
   // One of the library's threads: `acknowledgement` of the message, or why there is none.
   static void acknowledged(jsCtx*, natsMsg* message, jsPubAck* acknowledgement, jsPubAckErr* error, void* answers) {
     const NatsOwned<natsMsg> owned(message);
@@ -59,6 +76,12 @@ class JetStreamPublisher::Answers {
   }
 
  private:
+  void ask(const std::vector<recorder::IdRange>& ranges) {
+    const MutexLock lock(mutex_);
+    if (asked_.size() + ranges.size() <= kMostAsked) {
+      asked_.insert(asked_.end(), ranges.begin(), ranges.end());
+    }
+  }
   void take(const char* id, Status status) {
     const MutexLock lock(mutex_);
     const auto known = numbers_.find(id);
@@ -75,10 +98,14 @@ class JetStreamPublisher::Answers {
   ConditionVariable arrived_;
   std::vector<Outcome> outcomes_ TARN_GUARDED_BY(mutex_);
   std::unordered_map<std::string, std::uint64_t> numbers_ TARN_GUARDED_BY(mutex_);
+  std::vector<recorder::IdRange> asked_ TARN_GUARDED_BY(mutex_);
 };
 
 JetStreamPublisher::JetStreamPublisher(const ServerSettings& settings, const std::string& device)
-    : settings_(settings), subject_(settings.subject + "." + device), answers_(std::make_unique<Answers>()) {}
+    : settings_(settings),
+      subject_(settings.subject + "." + device),
+      againSubject_(againSubject(settings.subject, device)),
+      answers_(std::make_unique<Answers>()) {}
 
 JetStreamPublisher::~JetStreamPublisher() {
   disconnect();
@@ -93,6 +120,7 @@ void JetStreamPublisher::disconnect() {
   if (connection_) {
     natsConnection_Close(connection_.get());
   }
+  again_.reset();
   context_.reset();
   connection_.reset();
 }
@@ -112,6 +140,13 @@ Status JetStreamPublisher::connect() {
     return natsError("JetStream", status);
   }
   context_.reset(context);
+  natsSubscription* again = nullptr;
+  if (const natsStatus status =
+          natsConnection_Subscribe(&again, connection_.get(), againSubject_.c_str(), &Answers::heard, answers_.get());
+      status != NATS_OK) {
+    return natsError(againSubject_, status);
+  }
+  again_.reset(again);
   return {};
 }
 
@@ -142,6 +177,15 @@ void JetStreamPublisher::wait(std::chrono::milliseconds longest, std::vector<Out
     answers_->lose(Error{0, settings_.urls + ": " + reason});
   }
   answers_->wait(longest, outcomes);
+}
+
+void JetStreamPublisher::asked(std::vector<recorder::IdRange>& ranges) {
+  const auto now = std::chrono::steady_clock::now();
+  if (!isConnected() && now >= nextTry_) {
+    nextTry_ = now + kBetweenTries;
+    static_cast<void>(connect());  // why it can't is told when something is to be published
+  }
+  answers_->takeAsked(ranges);
 }
 
 }  // namespace tarn::fleet

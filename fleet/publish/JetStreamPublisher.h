@@ -1,11 +1,13 @@
 // SPDX-License-Identifier: Apache-2.0
 // JetStreamPublisher: a publisher to NATS JetStream, by its own library. A message that is to be published connects it,
 // where it isn't connected; that may wait a few seconds for each server, and who publishes chooses the pauses between
-// such tries. Each message goes with its id as Nats-Msg-Id, by which the stream drops what it has already.
+// such tries. Each message goes with its id as Nats-Msg-Id, by which the stream drops what it has already. While it is
+// connected it hears what the device is asked for on SUBJECT-again.DEVICE.
 //
 // Threads: one at a time; the library's own hand over outcomes.
 #pragma once
 
+#include <chrono>
 #include <memory>
 #include <string>
 
@@ -28,6 +30,8 @@ class JetStreamPublisher final : public Publisher {
 
   [[nodiscard]] Status publish(std::uint64_t number, const std::string& id, const std::string& bytes) override;
   void wait(std::chrono::milliseconds longest, std::vector<Outcome>& outcomes) override;
+  // Connects once a minute where nothing else does.
+  void asked(std::vector<recorder::IdRange>& ranges) override;
 
  private:
   class Answers;
@@ -38,9 +42,12 @@ class JetStreamPublisher final : public Publisher {
 
   const ServerSettings settings_;
   const std::string subject_;
+  const std::string againSubject_;
   const std::unique_ptr<Answers> answers_;
   NatsOwned<natsConnection> connection_;
   NatsOwned<jsCtx> context_;
+  NatsOwned<natsSubscription> again_;
+  std::chrono::steady_clock::time_point nextTry_{};  // to connect when nothing is to be published
 };
 
 }  // namespace tarn::fleet

@@ -5,6 +5,7 @@
 //   publish(7, id, bytes) -> ... wait() -> {7, ok}       it has arrived and stays there
 //                                       -> {7, error}    it may have arrived or not: publish it again
 //                                       -> nothing       the same, after a while
+//   asked() -> ids to read and publish again: who has the messages lacks them
 //
 // A message that is published again has the same id and the same bytes, so who gets it twice can tell. Threads: one at
 // a time; what it does on others is its own.
@@ -16,6 +17,7 @@
 #include <vector>
 
 #include "plist/Result.h"
+#include "recorder/store/retention/IdRange.h"
 
 namespace tarn::fleet {
 
@@ -33,6 +35,9 @@ class Publisher {
   [[nodiscard]] virtual Status publish(std::uint64_t number, const std::string& id, const std::string& bytes) = 0;
   // Waits until there is an outcome or the time is up, and appends those that are known.
   virtual void wait(std::chrono::milliseconds longest, std::vector<Outcome>& outcomes) = 0;
+  // Appends the ranges of ids that were asked for since the last call, in any order; for a place where nobody asks,
+  // none. They are whoever's words: the device may have them or not.
+  virtual void asked(std::vector<recorder::IdRange>& /*ranges*/) {}
 };
 
 }  // namespace tarn::fleet

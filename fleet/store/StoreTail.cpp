@@ -13,6 +13,13 @@ Result<recorder::EventPage> StoreTail::read(std::int64_t after, std::size_t limi
   return events_.read(query);
 }
 
+Result<recorder::EventPage> StoreTail::readEarlier(std::int64_t after, std::size_t limit) {
+  recorder::EventQuery query;
+  query.after = after;
+  query.limit = limit;
+  return earlier_.read(query);
+}
+
 Status StoreTail::look() {
   sessions_ = std::make_unique<recorder::SessionReader>(file_);
   Status opened = sessions_->open();

@@ -27,10 +27,12 @@ struct StoreMark {
 
 class StoreTail final : public StoredSessions {
  public:
-  explicit StoreTail(const std::filesystem::path& file) : file_(file), events_(file) {}
+  explicit StoreTail(const std::filesystem::path& file) : file_(file), events_(file), earlier_(file) {}
 
   // Events after an id, so many at the most; from `since` (epoch seconds) on where that is given.
   Result<recorder::EventPage> read(std::int64_t after, std::size_t limit, std::optional<double> since = {});
+  // The same of ids that were read before, without moving the place where read() notices that the file is another.
+  Result<recorder::EventPage> readEarlier(std::int64_t after, std::size_t limit);
   // Lets find() tell of the file as it is now. Nothing before that; the error when there is nothing to look at.
   [[nodiscard]] Status look();
   Result<std::optional<StoredSession>> find(std::int64_t id) override;
@@ -43,6 +45,7 @@ class StoreTail final : public StoredSessions {
  private:
   const std::filesystem::path file_;
   recorder::EventReader events_;
+  recorder::EventReader earlier_;
   std::unique_ptr<recorder::SessionReader> sessions_;
 };
 

@@ -174,6 +174,7 @@ class Trials:
         if status != 0:
             self.context.fail(f"status {status} at the end")
         self.look_for_messages(polite)
+        polite.client.close()
 
     def look_for_messages(self, polite):
         reader = self.service.reader()
@@ -198,6 +199,7 @@ class Trials:
         self.polites.append(polite)
         self.let_fail(control.COUNT_ONLY)
         self.service.stop()
+        polite.client.close()
         return start, self.control[control.ALLOCATIONS]
 
     def one_start(self, ordinal, in_a_row):
@@ -231,6 +233,7 @@ class Trials:
         if status != 0:
             return f"status {status}: {self.service.log_text()[-200:]!r}"
         self.look_for_messages(polite)
+        polite.client.close()
         return None
 
 
@@ -274,6 +277,14 @@ def run(context, figures):
     trials = Trials(context, figures)
     planned = all_trials(context, trials)
     figures["of"] = len(planned)
+    try:
+        play(context, figures, trials, planned)
+    finally:  # hours of work
+        if context.only:
+            context.tell_part(context.only, figures)
+
+
+def play(context, figures, trials, planned):
     for name, trial, arguments in planned:
         if context.left() <= 0:
             break
@@ -285,5 +296,3 @@ def run(context, figures):
         else:
             figures["survived"] += 1
     trials.account()
-    if context.only:
-        context.tell_part(context.only, figures)

@@ -30,7 +30,7 @@ TEST(ExportOptions, AFileThatIsNotNamedNeedNotBeThere) {
 TEST(ExportOptions, TheConfigurationSaysWhatLeaves) {
   const auto read = parseExportConfiguration(
       "[privacy]\nmode = 'local'\nkeys = ['a', 'b*']\nhashed = []\nsample = 0.25\nrotate_days = 30\n"
-      "[server]\nurls = 'tls://one:4222,tls://two:4222'\nanswer_seconds = 3\n",
+      "[server]\nurls = 'tls://one:4222,tls://two:4222'\nanswer_seconds = 3\nlongest_pause_seconds = 7\n",
       "export.toml");
   ASSERT_TRUE(read.ok()) << read.error.text();
   EXPECT_EQ(read.value.rules.mode, Mode::Local);
@@ -38,6 +38,8 @@ TEST(ExportOptions, TheConfigurationSaysWhatLeaves) {
   EXPECT_TRUE(read.value.rules.hashed.empty());
   EXPECT_EQ(read.value.rules.sample, 0.25);
   EXPECT_EQ(read.value.rules.rotateDays, 30);
+  EXPECT_EQ(read.value.server.longestPauseSeconds, 7);
+  EXPECT_TRUE(parseExportConfiguration("[server]\nlongest_pause_seconds = 0\n", "export.toml").failed());
   EXPECT_EQ(read.value.server.urls, "tls://one:4222,tls://two:4222");
   EXPECT_EQ(read.value.server.answerSeconds, 3);
 }

@@ -49,6 +49,11 @@ class FakePublisher final : public fleet::Publisher {
     outcomes_.erase(outcomes_.begin(), outcomes_.begin() + static_cast<std::ptrdiff_t>(taken));
   }
 
+  void asked(std::vector<recorder::IdRange>& ranges) override {
+    ranges.insert(ranges.end(), asked_.begin(), asked_.end());
+    asked_.clear();
+  }
+
   // Controls.
   double refuses = 0;       // the share of tries
   double loses = 0;         // never come
@@ -58,6 +63,9 @@ class FakePublisher final : public fleet::Publisher {
   // Keeps outcomes to itself.
   void setSilent(bool isSilent) { isSilent_ = isSilent; }
   void answer(std::uint64_t number, Status status) { outcomes_.push_back({number, std::move(status)}); }
+  void ask(const std::vector<recorder::IdRange>& ranges) { asked_.insert(asked_.end(), ranges.begin(), ranges.end()); }
+  // All that it has, though it was acknowledged.
+  void loseMessages() { messages_.clear(); }
   void forgetOutcomes() { outcomes_.clear(); }
 
   // Observations.
@@ -76,6 +84,7 @@ class FakePublisher final : public fleet::Publisher {
   std::vector<fleet::Outcome> outcomes_;
   std::map<std::string, std::string> messages_;
   std::vector<std::uint64_t> order_;
+  std::vector<recorder::IdRange> asked_;
   int tries_ = 0;
   int repeats_ = 0;
   int changed_ = 0;

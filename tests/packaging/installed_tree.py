@@ -160,7 +160,7 @@ class InstalledTree(unittest.TestCase):
         with open(example, encoding="utf-8") as file:
             lines = file.read().splitlines()
         keys = [line[1:] for line in lines if line.startswith("#") and not line.startswith("# ") and " = " in line]
-        self.assertEqual(len(keys), 18)
+        self.assertEqual(len(keys), 19)
         shown = os.path.join(self.folder, "export.toml")
         with open(shown, "w", encoding="utf-8") as file:
             file.write("\n".join(line[1:] if line[1:] in keys else line for line in lines) + "\n")
@@ -184,7 +184,7 @@ class InstalledTree(unittest.TestCase):
         with open(example, encoding="utf-8") as file:
             lines = file.read().splitlines()
         keys = [line[1:] for line in lines if line.startswith("#") and not line.startswith("# ") and " = " in line]
-        self.assertEqual(len(keys), 13)
+        self.assertEqual(len(keys), 14)
         shown = os.path.join(self.folder, "collect.toml")
         with open(shown, "w", encoding="utf-8") as file:
             file.write("\n".join(line[1:] if line[1:] in keys else line for line in lines).replace(

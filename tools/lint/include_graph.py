@@ -80,15 +80,17 @@ ROOMS = {
     "tools/ctl/terminal": PROGRAM,
     # What carries records of many devices to one place.
     "fleet/program": VALUES + ("host/system", "host/settings"),
-    "fleet/format": VALUES,
+    "fleet/format": VALUES + ("recorder/store/retention",),
     "fleet/privacy": VALUES + ("recorder/store",),
     "fleet/store": VALUES + STORE,
     "fleet/cursor": VALUES + STORE + ("fleet/store", "host/system"),
-    "fleet/publish": VALUES + ("fleet/cursor", "host/system"),
+    "fleet/publish": VALUES + ("fleet/cursor", "fleet/format", "host/system", "recorder/store/retention"),
     "fleet/export": VALUES + STORE + (
         "fleet/cursor", "fleet/publish", "fleet/format", "fleet/privacy", "fleet/program", "fleet/store",
         "host/loop", "host/settings", "host/system", "tools/ctl/terminal", "wire"),
-    "fleet/collect": VALUES + ("fleet/format", "fleet/program", "fleet/publish", "host/system", "tools/ctl/terminal"),
+    "fleet/collect": VALUES + (
+        "fleet/format", "fleet/program", "fleet/publish", "host/system", "recorder/store/retention",
+        "tools/ctl/terminal"),
     "fleet/ask": VALUES + ("fleet/collect", "recorder/store", "tools/ctl/terminal", "tools/report"),
     "tools/ctl": PROGRAM + ("client", "dictionary", "tools/script", "tools/ctl/terminal"),
     "tools/ctl/sessions": PROGRAM + ("tools/ctl", "tools/ctl/terminal", "tools/report", "tools/script"),

@@ -6,6 +6,7 @@
 #include <algorithm>
 
 #include "fleet/collect/CollectOptions.h"
+#include "fleet/collect/Inquiry.h"
 #include "fleet/collect/Schema.h"
 #include "tests/fleet/Batches.h"
 #include "tests/fleet/collect/MadeUpFleet.h"
@@ -150,10 +151,17 @@ TEST(FleetCollectOptions, WhatExcludesEachOtherIsWrongUsage) {
   EXPECT_NE(usageOf({"--help"}).output.find("--migrate"), std::string::npos);
 }
 
+TEST(FleetInquiry, WhatTwoLooksHaveInCommon) {
+  using Ranges = std::vector<recorder::IdRange>;
+  EXPECT_EQ(commonOf({{1, 5}, {8, 20}}, {{4, 9}, {11, 12}, {20, 30}}), (Ranges{{4, 5}, {8, 9}, {11, 12}, {20, 20}}));
+  EXPECT_EQ(commonOf({}, {{1, 2}}), Ranges());
+  EXPECT_EQ(commonOf({{1, 2}}, {{3, 4}}), Ranges());
+}
+
 TEST(FleetCollectOptions, TheConfigurationSaysWhereAndHowLong) {
   const auto read = parseCollectConfiguration(
       "[server]\nurls = \"nats://a:1,nats://b:2\"\nstream = \"S\"\nconsumer = \"c\"\nanswer_seconds = "
-      "7\n[database]\nurl = "
+      "7\nagain_seconds = 0\n[database]\nurl = "
       "\"dbname=x\"\ngroup_messages = 8\n[retention]\ndays = 30\n",
       "collect.toml");
   ASSERT_TRUE(read.ok()) << read.error.text();
@@ -161,6 +169,7 @@ TEST(FleetCollectOptions, TheConfigurationSaysWhereAndHowLong) {
   EXPECT_EQ(read.value.stream, "S");
   EXPECT_EQ(read.value.consumer, "c");
   EXPECT_EQ(read.value.answerSeconds, 7);
+  EXPECT_EQ(read.value.againSeconds, 0);
   EXPECT_EQ(read.value.database, "dbname=x");
   EXPECT_EQ(read.value.groupMessages, 8);
   EXPECT_EQ(read.value.retentionDays, 30);

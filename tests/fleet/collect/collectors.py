@@ -2,6 +2,7 @@
 """Real tarnreporting-collect side by side, between a cluster and a database."""
 
 import os
+import re
 import signal
 import subprocess
 import time
@@ -16,7 +17,8 @@ class Collectors:
         configuration = os.path.join(folder, "collect.toml")
         with open(configuration, "w", encoding="utf-8") as file:
             # What a killed one held is to come soon.
-            file.write(f"[server]\nurls = \"{urls}\"\nanswer_seconds = 5\n[database]\nurl = \"{database}\"\n")
+            file.write(f"[server]\nurls = \"{urls}\"\nanswer_seconds = 5\nagain_seconds = 2\n"
+                       f"[database]\nurl = \"{database}\"\n")
         self.command = [program, "--config", configuration, "--log-level", "debug"]
 
     def start(self):
@@ -37,6 +39,10 @@ class Collectors:
         for each in self.running:
             each.send_signal(how)
         return [each.wait() for each in self.running]
+
+    def asked_again(self):
+        """Ids that devices were asked for again, those of which they were asked twice counted twice."""
+        return sum(int(count) for count in re.findall(r"asked for (\d+) ids again", self.logged()))
 
     def logged(self):
         with open(self.log, encoding="utf-8") as file:
