@@ -120,8 +120,11 @@ class Outage(unittest.TestCase):
 
         self.device.send(60)
         self.assertGreater(self.device.ledger()["recorder_expired"], 0)
-        self.assertEqual(self.device.ledger()["recorder_expired_unexported"], {"count": 0})
-        self.assertLessEqual(set(range(left + 1, max(self.device.ids()) + 1)), self.device.ids())
+        # What has left goes first: as long as there is any of it, nothing else goes. How much goes is the log's size to
+        # say, which is another on a busy machine.
+        unexported, kept = self.device.ledger()["recorder_expired_unexported"]["count"], self.device.ids()
+        self.assertEqual(unexported, len(set(range(left + 1, max(kept) + 1)) - kept))
+        self.assertTrue(unexported == 0 or min(kept) > left, f"{unexported} went, and {min(kept)} is there still")
 
         self.device.send(1500)
         counted = self.device.ledger()["recorder_expired_unexported"]
@@ -162,7 +165,7 @@ class Outage(unittest.TestCase):
         self.assertEqual(events | gaps, set(range(1, max(self.device.ids()) + 1)))
         self.assertEqual(events & gaps, set())
         self.assertLessEqual(kept, events)
-        self.assertGreater(len(gaps), 1000)
+        self.assertGreater(len(gaps), 0)  # what the exporter had read already leaves still
 
 
 if __name__ == "__main__":

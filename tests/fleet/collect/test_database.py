@@ -22,7 +22,7 @@ class Database(Collecting):
         self.assertEqual([each.returncode for each in asked], [0] * 4, texts)
         self.assertEqual(sorted(int(text.split()[1]) for text in texts)[:3], [0, 0, 0], texts)
         self.assertEqual(self.database.ask("SELECT version, name FROM schema_versions ORDER BY 1"),
-                         [["1", "001_tables"], ["2", "002_views"], ["3", "003_questions"]])
+                         [["1", "001_tables"], ["2", "002_views"], ["3", "003_questions"], ["4", "004_places"]])
 
     def test_a_layout_that_is_old_or_later_than_known_is_told(self):
         os.makedirs(os.path.join(self.folder, "none"))
