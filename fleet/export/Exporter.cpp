@@ -75,13 +75,8 @@ Status Exporter::fill(const ExportClock& now) {
     nextLook_ = now.monotonic + kBetweenLooks;
     status = lookAtOpen(now);
   }
-  // A page at a time, so that what is new isn't held up.
-  if (status.ok() && window_.hasRoom()) {
-    takeAsked(now);
-    status = answer(now);
-  }
-  if (status.ok()) {
-    status = tellPlace(now);
+  if (status.ok() && publisher_.hasAsker()) {
+    status = serveAsker(now);
   }
   store_.rest();
   return status;
@@ -152,6 +147,15 @@ Status Exporter::lookAtOpen(const ExportClock& now) {
   std::set_difference(next_.open.begin(), next_.open.end(), news.begin(), news.end(), std::back_inserter(left));
   next_.open = std::move(left);
   return add(std::move(made.value));
+}
+
+// A page at a time, so that what is new isn't held up.
+Status Exporter::serveAsker(const ExportClock& now) {
+  if (window_.hasRoom()) {
+    takeAsked(now);
+    if (Status answered = answer(now); answered.failed()) return answered;
+  }
+  return tellPlace(now);
 }
 
 void Exporter::takeAsked(const ExportClock& now) {

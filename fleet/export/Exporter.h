@@ -64,6 +64,7 @@ class Exporter {
   // Whether the store is the one that the cursor is of; else it begins anew.
   [[nodiscard]] Status checkMark();
   [[nodiscard]] Status lookAtOpen(const ExportClock& now);
+  [[nodiscard]] Status serveAsker(const ExportClock& now);
   [[nodiscard]] Status answer(const ExportClock& now);
   void takeAsked(const ExportClock& now);
   [[nodiscard]] Status tellPlace(const ExportClock& now);

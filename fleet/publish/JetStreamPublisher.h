@@ -30,6 +30,7 @@ class JetStreamPublisher final : public Publisher {
 
   [[nodiscard]] Status publish(std::uint64_t number, const std::string& id, const std::string& bytes) override;
   void wait(std::chrono::milliseconds longest, std::vector<Outcome>& outcomes) override;
+  bool hasAsker() const override { return true; }
   // Connects once a minute where nothing else does.
   void asked(std::vector<recorder::IdRange>& ranges) override;
 

@@ -35,8 +35,10 @@ class Publisher {
   [[nodiscard]] virtual Status publish(std::uint64_t number, const std::string& id, const std::string& bytes) = 0;
   // Waits until there is an outcome or the time is up, and appends those that are known.
   virtual void wait(std::chrono::milliseconds longest, std::vector<Outcome>& outcomes) = 0;
-  // Appends the ranges of ids that were asked for since the last call, in any order; for a place where nobody asks,
-  // none. They are whoever's words: the device may have them or not.
+  // Whether somebody there misses what is lost and asks for it again.
+  virtual bool hasAsker() const { return false; }
+  // Appends the ranges of ids that were asked for since the last call, in any order. They are whoever's words: the
+  // device may have them or not.
   virtual void asked(std::vector<recorder::IdRange>& /*ranges*/) {}
 };
 

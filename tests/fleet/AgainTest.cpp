@@ -199,6 +199,17 @@ TEST_F(FleetAgain, WhenNothingNewComesItSaysOnceHowFarItIs) {
   EXPECT_EQ(batches().front()->sessions_size(), 0);
 }
 
+TEST_F(FleetAgain, WhereNobodyAsksItSaysNothingAndAnswersNothing) {
+  publisher_.hasAskers = false;
+  beginWith(100);
+  loseAndAsk({{1, 100}});
+  for (int second = 0; second < 100; ++second) {
+    now_ += 1s;
+    step();
+  }
+  EXPECT_EQ(publisher_.messages().size(), 0U);
+}
+
 TEST_F(FleetAgain, ItSaysItAnewWhenItIsFurtherAndAfterARestart) {
   beginWith(100);
   const auto beQuiet = [this] {

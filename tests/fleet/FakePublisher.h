@@ -49,6 +49,7 @@ class FakePublisher final : public fleet::Publisher {
     outcomes_.erase(outcomes_.begin(), outcomes_.begin() + static_cast<std::ptrdiff_t>(taken));
   }
 
+  bool hasAsker() const override { return hasAskers; }
   void asked(std::vector<recorder::IdRange>& ranges) override {
     ranges.insert(ranges.end(), asked_.begin(), asked_.end());
     asked_.clear();
@@ -59,6 +60,7 @@ class FakePublisher final : public fleet::Publisher {
   double loses = 0;         // never come
   double losesAnswers = 0;  // came, and the word of it is lost
   bool reorders = false;
+  bool hasAskers = true;
   void setDown(bool isDown) { isDown_ = isDown; }
   // Keeps outcomes to itself.
   void setSilent(bool isSilent) { isSilent_ = isSilent; }
