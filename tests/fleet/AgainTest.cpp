@@ -118,6 +118,21 @@ TEST_F(FleetAgain, MoreThanAPageComesInSeveralMessages) {
   EXPECT_GE(publisher_.messages().size(), 4U);
 }
 
+TEST_F(FleetAgain, WhatDoesNotFitIntoOneMessageIsNotTakenForGone) {
+  makeStore();
+  addSession({});
+  for (int i = 0; i < 50; ++i) {
+    addEvent(1, 1795158000, "tally", "sys.oxbow.tarnkit.Volume.Summary",
+             R"({"a":")" + std::string(10'000, 'x') + "\"}");
+  }
+  begin();
+  runToTheEnd();
+  loseAndAsk({{1, 50}});
+  EXPECT_EQ(arrivedAt(publisher_).events.size(), 50U);
+  EXPECT_EQ(arrivedAt(publisher_).gaps.size(), 0U);
+  EXPECT_EQ(publisher_.messages().size(), 2U);
+}
+
 TEST_F(FleetAgain, WhatSeveralAskForComesOnce) {
   beginWith(100);
   publisher_.ask({{40, 60}, {10, 20}});
@@ -132,6 +147,7 @@ TEST_F(FleetAgain, WhatItHasNotReadYetIsLeftToItself) {
   loseAndAsk({{101, 200}, {90, kGreatest}, {kGreatest, kGreatest}});
   EXPECT_EQ(arrivedAt(publisher_).events.size(), 11U);
   EXPECT_EQ(arrivedAt(publisher_).gaps.size(), 0U);
+  EXPECT_EQ(run_->exporter.askedAgain(), 11);
   publisher_.loseMessages();
   addEvents(20);
   runToTheEnd();
