@@ -1,7 +1,6 @@
 // SPDX-License-Identifier: Apache-2.0
 #include "fleet/collect/Inquiry.h"
 
-#include <algorithm>
 #include <utility>
 
 #include "fleet/format/Again.h"
@@ -49,19 +48,6 @@ std::string arrayOfNumbers(const std::set<std::int32_t>& numbers) {
 }
 
 }  // namespace
-
-std::vector<recorder::IdRange> commonOf(const std::vector<recorder::IdRange>& some,
-                                        const std::vector<recorder::IdRange>& others) {
-  std::vector<recorder::IdRange> both;
-  for (std::size_t i = 0, j = 0; i < some.size() && j < others.size();) {
-    const recorder::IdRange range{std::max(some[i].first, others[j].first), std::min(some[i].last, others[j].last)};
-    if (range.first <= range.last) {
-      both.push_back(range);
-    }
-    some[i].last < others[j].last ? ++i : ++j;
-  }
-  return both;
-}
 
 Result<Inquiry::Found> Inquiry::find() {
   Result<Found> found;

@@ -52,8 +52,4 @@ class Inquiry {
   Ranges before_;  // what the last look found
 };
 
-// What rising ranges have in common, rising.
-std::vector<recorder::IdRange> commonOf(const std::vector<recorder::IdRange>& some,
-                                        const std::vector<recorder::IdRange>& others);
-
 }  // namespace tarn::fleet

@@ -30,19 +30,6 @@ void matchesGlob(sqlite3_context* context, int, sqlite3_value** values) {
   sqlite3_result_int(context, globMatches(valueText(values[0]), valueText(values[1])) ? 1 : 0);
 }
 
-// What both have, of ranges that rise.
-std::vector<IdRange> common(const std::vector<IdRange>& some, const std::vector<IdRange>& others) {
-  std::vector<IdRange> both;
-  for (std::size_t i = 0, j = 0; i < some.size() && j < others.size();) {
-    const IdRange range{std::max(some[i].first, others[j].first), std::min(some[i].last, others[j].last)};
-    if (range.first <= range.last) {
-      both.push_back(range);
-    }
-    some[i].last < others[j].last ? ++i : ++j;
-  }
-  return both;
-}
-
 // Adds the first column of all rows; SQLite's result code.
 int addFirsts(Statement& rows, std::vector<std::int64_t>& firsts) {
   int code = rows.step();
@@ -158,7 +145,7 @@ int prepareRows(Connection& connection, const EventSelect& events, const EventQu
 Result<std::vector<IdRange>> findPlaces(Connection& connection, const EventQuery& query, IdRange ids) {
   Result<std::vector<IdRange>> places{{ids}, {}};
   const auto narrow = [&places](Result<std::vector<IdRange>> found) {
-    places.value = common(places.value, found.value);
+    places.value = commonOf(places.value, found.value);
     places.error = found.error;
   };
   if (query.since || query.until) {

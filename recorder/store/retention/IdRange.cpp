@@ -35,6 +35,18 @@ std::vector<IdRange> without(IdRange range, const std::vector<IdRange>& others) 
   return left;
 }
 
+std::vector<IdRange> commonOf(const std::vector<IdRange>& some, const std::vector<IdRange>& others) {
+  std::vector<IdRange> both;
+  for (std::size_t i = 0, j = 0; i < some.size() && j < others.size();) {
+    const IdRange range{std::max(some[i].first, others[j].first), std::min(some[i].last, others[j].last)};
+    if (range.first <= range.last) {
+      both.push_back(range);
+    }
+    some[i].last < others[j].last ? ++i : ++j;
+  }
+  return both;
+}
+
 std::int64_t countOf(const std::vector<IdRange>& ranges) {
   std::int64_t count = 0;
   for (const IdRange& range : ranges) {

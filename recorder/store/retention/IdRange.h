@@ -20,6 +20,8 @@ struct IdRange {
 void addRange(std::vector<IdRange>& ranges, IdRange range);
 // What is left of a range when these, which rise, are taken out.
 std::vector<IdRange> without(IdRange range, const std::vector<IdRange>& others);
+// What rising ranges have in common, rising.
+std::vector<IdRange> commonOf(const std::vector<IdRange>& some, const std::vector<IdRange>& others);
 // Ids in all of them.
 std::int64_t countOf(const std::vector<IdRange>& ranges);
 // "3, 5-9 and 2 more ranges": the first eight.

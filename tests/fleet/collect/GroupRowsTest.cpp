@@ -6,7 +6,6 @@
 #include <algorithm>
 
 #include "fleet/collect/CollectOptions.h"
-#include "fleet/collect/Inquiry.h"
 #include "fleet/collect/Schema.h"
 #include "tests/fleet/Batches.h"
 #include "tests/fleet/collect/MadeUpFleet.h"
@@ -149,13 +148,6 @@ TEST(FleetCollectOptions, WhatExcludesEachOtherIsWrongUsage) {
   EXPECT_EQ(usageOf({"--once", "--from", "there"}).usage.code(), 64);
   EXPECT_EQ(usageOf({"--log-level", "loud"}).usage.code(), 64);
   EXPECT_NE(usageOf({"--help"}).output.find("--migrate"), std::string::npos);
-}
-
-TEST(FleetInquiry, WhatTwoLooksHaveInCommon) {
-  using Ranges = std::vector<recorder::IdRange>;
-  EXPECT_EQ(commonOf({{1, 5}, {8, 20}}, {{4, 9}, {11, 12}, {20, 30}}), (Ranges{{4, 5}, {8, 9}, {11, 12}, {20, 20}}));
-  EXPECT_EQ(commonOf({}, {{1, 2}}), Ranges());
-  EXPECT_EQ(commonOf({{1, 2}}, {{3, 4}}), Ranges());
 }
 
 TEST(FleetCollectOptions, TheConfigurationSaysWhereAndHowLong) {
