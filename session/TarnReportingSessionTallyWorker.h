@@ -11,14 +11,13 @@
 #pragma once
 
 #include <memory>
-#include <string>
 #include <string_view>
-#include <unordered_map>
 
-#include "service/vocabulary/TarnReportingVocabulary.h"
 #include "session/TarnReportingSessionWorker.h"
 
 namespace tarn {
+
+class TarnReportingTallyNames;
 
 // It has no start and no stop of its own: the session notes that it runs.
 class TarnReportingSessionTallyWorker : public TarnReportingSessionWorkerProtocol,
@@ -39,16 +38,7 @@ class TarnReportingSessionTallyWorker : public TarnReportingSessionWorkerProtoco
   void handleMessage(const std::shared_ptr<TarnReportingSessionMessage>& message) override;
 
  private:
-  struct EventNames {
-    std::string ofMessage;  // "sys.oxbow.tarnkit.%@.%@"
-    std::string ofService;  // "sys.oxbow.%@.%@.%@"
-  };
-  // Made on first use and kept. The reference holds until the next call.
-  const EventNames& namesFor(AudioServiceType serviceType, AudioEventCategory category, AudioEventType type);
-
-  // The names of the few kinds of messages that a session sees over and over; cleared when a client floods it.
-  static constexpr std::size_t kNamesLimit = 256;
-  std::unordered_map<std::uint64_t, EventNames> names_;
+  std::shared_ptr<TarnReportingTallyNames> names_;  // from the first message on
 };
 
 }  // namespace tarn
