@@ -28,8 +28,11 @@ void TarnReportingSessionPreviousValues::merge(const plist::Dictionary& payload)
   } else if (recent_.size() != kRecentLimit) {
     recent_.push_back(payload);
   } else {
+    if (older_ == nullptr) {
+      older_ = std::make_unique<std::unordered_map<plist::Key, plist::Value>>();
+    }
     for (const plist::Dictionary::Entry& entry : recent_.front()) {
-      older_.insert_or_assign(entry.key, plist::Value(entry.value));
+      older_->insert_or_assign(entry.key, plist::Value(entry.value));
     }
     recent_.front() = payload;
     std::rotate(recent_.begin(), std::next(recent_.begin()), recent_.end());
@@ -37,13 +40,11 @@ void TarnReportingSessionPreviousValues::merge(const plist::Dictionary& payload)
 }
 
 void TarnReportingSessionPreviousValues::merge(const TarnReportingSessionPreviousValues& other) {
-  if (recent_.empty()) {
-    *this = other;
-  } else {
-    merge(dictionaryOf(other.older_));
-    for (const plist::Dictionary& payload : other.recent_) {
-      merge(payload);
-    }
+  if (other.older_ != nullptr) {
+    merge(dictionaryOf(*other.older_));
+  }
+  for (const plist::Dictionary& payload : other.recent_) {
+    merge(payload);
   }
 }
 
@@ -51,8 +52,9 @@ plist::ValueView TarnReportingSessionPreviousValues::get(const plist::Key& key) 
   for (auto payload = recent_.rbegin(); payload != recent_.rend(); ++payload) {
     if (const plist::ValueView value = payload->get(key)) return value;
   }
-  const auto found = older_.find(key);
-  return found == older_.end() ? plist::ValueView() : found->second.view();
+  if (older_ == nullptr) return {};
+  const auto found = older_->find(key);
+  return found == older_->end() ? plist::ValueView() : found->second.view();
 }
 
 // In one pass: merging shape by shape would walk all that was gathered so far once for each.
@@ -63,8 +65,10 @@ plist::Dictionary TarnReportingSessionPreviousValues::dictionary() const {
       latest.emplace(entry.key, entry.value);
     }
   }
-  for (const auto& [key, value] : older_) {
-    latest.emplace(key, value.view());
+  if (older_ != nullptr) {
+    for (const auto& [key, value] : *older_) {
+      latest.emplace(key, value.view());
+    }
   }
   return dictionaryOf(latest);
 }

@@ -10,6 +10,7 @@
 #pragma once
 
 #include <cstddef>
+#include <memory>
 #include <unordered_map>
 #include <vector>
 
@@ -38,7 +39,8 @@ class TarnReportingSessionPreviousValues {
   static constexpr std::size_t kRecentLimit = 16;
 
   std::vector<plist::Dictionary> recent_;  // oldest first, no two of the same key list
-  std::unordered_map<plist::Key, plist::Value> older_;
+  // From the seventeenth shape on: most sessions see a few, and many none.
+  std::unique_ptr<std::unordered_map<plist::Key, plist::Value>> older_;
 };
 
 }  // namespace tarn

@@ -56,9 +56,13 @@ bool wants(const Member& member, const TarnReportingSessionMessage& message) {
 
 void TarnReportingSessionWorkerSet::startWorkersFromClasses(const TarnReportingSessionWorkerClasses::List& classes,
                                                             const std::shared_ptr<TarnReportingSession>& session) {
+  if (messageWorkers_.empty()) {
+    messageWorkers_.reserve(classes.size());
+  }
   for (const Class* workerClass : classes) {
     makeWorker(*workerClass, session);
   }
+  messageWorkers_.shrink_to_fit();  // a client may have thousands of sessions
   startWorkers(session->reporterID());
 }
 
