@@ -237,7 +237,6 @@ std::shared_ptr<TarnReportingSession> TarnReportingClientServerInstance::findRep
 std::shared_ptr<TarnReportingSession> TarnReportingClientServerInstance::makeSession(std::int64_t reporterID) {
   auto session = TarnReportingSession::initWithID(
       reporterID, {processIdentifier_}, TarnReportingSession::Mode::Ordinary, {connection_, user_, clientProcessName_});
-  session->setClientProcessName(clientProcessName_);
   if (!logAccount_) {
     logAccount_ = ProcessState::of<TarnReportingSessionLogMemory>()->makeAccount(user_);
   }

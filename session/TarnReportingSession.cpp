@@ -28,16 +28,10 @@ platform::SessionRecords* recordsFor(TarnReportingSession::Mode mode) {
   return mode == TarnReportingSession::Mode::Ordinary ? TarnReportingFacilities().sessionRecords : nullptr;
 }
 
-platform::SessionFacts factsOf(std::int64_t reporterID, const std::vector<std::int32_t>& processIdentifiers,
-                               const TarnReportingSession::Opener& opener, std::string_view serviceName) {
-  platform::SessionFacts facts;
-  facts.reporter = reporterID;
-  facts.connection = opener.connection;
-  facts.pid = processIdentifiers.empty() ? 0 : processIdentifiers.front();
-  facts.uid = opener.user;
-  facts.process = opener.process;
-  facts.serviceName = serviceName;
-  return facts;
+// By which application the session records know the session.
+std::string applicationOf(const plist::Dictionary& configuration) {
+  const plist::ValueView application = configuration.get(keys::kHostApplicationDisplayID);
+  return application ? application.asText() : std::string();
 }
 
 // The table of worker classes and, once the first session is made, the lists derived from it.
@@ -90,9 +84,12 @@ TarnReportingSession::TarnReportingSession(std::int64_t reporterID, std::vector<
     : reporterID_(reporterID),
       processIdentifiers_(std::move(processIdentifiers)),
       mode_(mode),
+      user_(opener.user),
+      connection_(opener.connection),
       serviceName_(TarnReportingUtilityGenerateServiceNameFromServiceType(serviceType_)),
       application_(TarnReportingUtilityRetrieveAppName(configuration_)),
-      chronicle_(recordsFor(mode), factsOf(reporterID, processIdentifiers_, opener, serviceName_)),
+      clientProcessName_(opener.process),
+      chronicle_(recordsFor(mode), facts()),
       log_(reporterID) {}
 
 TarnReportingSession::~TarnReportingSession() {
@@ -105,10 +102,16 @@ TarnReportingSession::~TarnReportingSession() {
 void TarnReportingSession::setServiceType(AudioServiceType serviceType) {
   TarnReportingRequireServerQueue();
   const platform::SessionScope scope = chronicle_.enter();
+  const std::string_view serviceName = TarnReportingUtilityGenerateServiceNameFromServiceType(serviceType);
+  if (chronicle_.isKept() && serviceType != serviceType_) {
+    platform::SessionFacts changed = facts();
+    changed.serviceType = static_cast<std::int64_t>(serviceType);
+    changed.serviceName = serviceName;
+    chronicle_.describe(changed);
+  }
   serviceType_ = serviceType;
-  serviceName_ = TarnReportingUtilityGenerateServiceNameFromServiceType(serviceType);
+  serviceName_ = serviceName;
   kLog(LogLevel::Info, "setting service type %@", serviceName_);
-  describe();
 }
 
 void TarnReportingSession::updateConfigurationWithContentsOfConfiguration(const plist::Dictionary* configuration) {
@@ -119,25 +122,39 @@ void TarnReportingSession::updateConfigurationWithContentsOfConfiguration(const 
   plist::Dictionary merged = configuration_;
   merged.set(keys::kHostApplicationDisplayID, configuration->get(kMirrored));
   merged.merge(*configuration);
-  application_ = plist::Key(TarnReportingUtilityRetrieveAppName(merged));
+  plist::Key appName(TarnReportingUtilityRetrieveAppName(merged));
+  if (chronicle_.isKept()) {
+    std::string application = applicationOf(merged);
+    if (application != applicationOf(configuration_)) {
+      platform::SessionFacts changed = facts();
+      changed.application = std::move(application);
+      chronicle_.describe(changed);
+    }
+  }
+  application_ = std::move(appName);
   configuration_ = std::move(merged);
-  describe();
 }
 
 void TarnReportingSession::setClientProcessName(std::string name) {
+  if (chronicle_.isKept() && name != clientProcessName_) {
+    platform::SessionFacts changed = facts();
+    changed.process = name;
+    chronicle_.describe(changed);
+  }
   clientProcessName_ = std::move(name);
-  describe();
 }
 
-void TarnReportingSession::describe() {
-  if (!chronicle_.isKept()) return;
-  platform::SessionFacts facts = chronicle_.facts();
+platform::SessionFacts TarnReportingSession::facts() const {
+  platform::SessionFacts facts;
+  facts.reporter = reporterID_;
+  facts.connection = connection_;
+  facts.pid = processIdentifiers_.empty() ? 0 : processIdentifiers_.front();
+  facts.uid = user_;
   facts.process = clientProcessName_;
-  const plist::ValueView application = configuration_.get(keys::kHostApplicationDisplayID);
-  facts.application = application ? application.asText() : std::string();
+  facts.application = applicationOf(configuration_);
   facts.serviceType = static_cast<std::int64_t>(serviceType_);
   facts.serviceName = serviceName_;
-  chronicle_.describe(std::move(facts));
+  return facts;
 }
 
 void TarnReportingSession::start() {

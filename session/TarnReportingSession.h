@@ -46,9 +46,10 @@ class TarnReportingSession : public std::enable_shared_from_this<TarnReportingSe
   // The table that was handed over; empty before.
   static std::span<const TarnReportingSessionWorkerClass> getAllWorkerClasses();
 
-  // A session with its start-on-creation workers running. It has no service type (65535), no configuration and no name
-  // of its client. `processIdentifiers` are those that the session reports for, the owner's first. Logs the ID at info
-  // level. The session records are told of every session but a single-message one: no client opened that.
+  // A session with its start-on-creation workers running. It has no service type (65535), no configuration, and the
+  // opener's name for its client's. `processIdentifiers` are those that the session reports for, the owner's first.
+  // Logs the ID at info level. The session records are told of every session but a single-message one: no client opened
+  // that.
   static std::shared_ptr<TarnReportingSession> initWithID(std::int64_t reporterID,
                                                           std::vector<std::int32_t> processIdentifiers,
                                                           Mode mode = Mode::Ordinary, const Opener& opener = {});
@@ -172,14 +173,17 @@ class TarnReportingSession : public std::enable_shared_from_this<TarnReportingSe
   void complete(TarnReportingSessionMessage& message);
   std::size_t takeIn(const MessagePointer& message);
   TarnReportingSessionTags& tags();
-  // Tells the chronicle what became known.
-  void describe();
+  // What the session records know of it. They are told of a change before it is made, so what can't be told isn't done,
+  // and the client's next try tells it.
+  platform::SessionFacts facts() const;
   // A stamped and tagged marker of this type; `method` is "start" or "stop" and the end of its keys.
   void appendMarker(AudioEventType type, std::string_view method);
 
   const std::int64_t reporterID_;
   const std::vector<std::int32_t> processIdentifiers_;
   const Mode mode_;
+  const std::uint32_t user_;
+  const std::int64_t connection_;
   bool started_ = false;
   AudioServiceType serviceType_ = AudioServiceType::Unknown;
   std::string_view serviceName_;

@@ -2,7 +2,6 @@
 #include "session/TarnReportingSessionChronicle.h"
 
 #include <new>
-#include <utility>
 
 namespace tarn {
 
@@ -20,13 +19,13 @@ void tellIfPossible(Tell&& tell) noexcept {
 }  // namespace
 
 TarnReportingSessionChronicle::TarnReportingSessionChronicle(platform::SessionRecords* records,
-                                                             platform::SessionFacts facts)
-    : records_(records), number_(records == nullptr ? 0 : records->created(facts)), facts_(std::move(facts)) {}
+                                                             const platform::SessionFacts& facts)
+    : records_(records), number_(records == nullptr ? 0 : records->created(facts)) {}
 
-void TarnReportingSessionChronicle::describe(platform::SessionFacts facts) {
-  if (records_ == nullptr || facts == facts_) return;
-  records_->described(number_, facts);
-  facts_ = std::move(facts);
+void TarnReportingSessionChronicle::describe(const platform::SessionFacts& facts) {
+  if (records_ != nullptr) {
+    records_->described(number_, facts);
+  }
 }
 
 void TarnReportingSessionChronicle::start() {

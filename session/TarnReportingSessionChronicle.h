@@ -31,7 +31,7 @@ class TarnReportingSessionChronicle {
   // Of a session that nobody is told of.
   TarnReportingSessionChronicle() = default;
   // Tells of a new session; null: nobody keeps records.
-  TarnReportingSessionChronicle(platform::SessionRecords* records, platform::SessionFacts facts);
+  TarnReportingSessionChronicle(platform::SessionRecords* records, const platform::SessionFacts& facts);
   TarnReportingSessionChronicle(const TarnReportingSessionChronicle&) = delete;
   TarnReportingSessionChronicle& operator=(const TarnReportingSessionChronicle&) = delete;
   // A session that was neither ended nor stopped ends as destroyed: its making failed, or the service went first.
@@ -41,10 +41,8 @@ class TarnReportingSessionChronicle {
   [[nodiscard]] platform::SessionScope enter() const noexcept { return {records_, number_}; }
   // Whether anybody is told.
   bool isKept() const noexcept { return records_ != nullptr; }
-  // What was told last.
-  const platform::SessionFacts& facts() const noexcept { return facts_; }
-  // Tells what differs from that, if anything does.
-  void describe(platform::SessionFacts facts);
+  // Tells what the session is from now on.
+  void describe(const platform::SessionFacts& facts);
   // A period begins, unless one has begun: a start that failed may be tried again.
   void start();
   // The session took a message in.
@@ -67,7 +65,6 @@ class TarnReportingSessionChronicle {
 
   platform::SessionRecords* const records_ = nullptr;
   const platform::SessionNumber number_ = 0;
-  platform::SessionFacts facts_;
   State state_ = State::Made;
   // Of the period: all that the intake took, what producers derived included, and those among them that repeated an
   // earlier one.

@@ -302,6 +302,23 @@ TEST_F(SessionChronicle, ASessionWhoseMakingFailsIsToldToBeOver) {
   EXPECT_EQ(RecordingSessionRecords::current(), 0);
 }
 
+TEST_F(SessionChronicle, AChangeThatThereIsNoMemoryToTellOfIsNotMadeUntilItIsTriedAgain) {
+  const auto session = makeSession();
+  const plist::Dictionary application{{"HostApplicationDisplayID", "sys.oxbow.music"}};
+  platform_.sessionRecords.failAll("described");
+  EXPECT_THROW(session->setServiceType(AudioServiceType::Telephony), std::bad_alloc);
+  EXPECT_THROW(session->updateConfigurationWithContentsOfConfiguration(&application), std::bad_alloc);
+  EXPECT_THROW(session->setClientProcessName("player"), std::bad_alloc);
+  EXPECT_EQ(session->serviceType(), AudioServiceType::Unknown);
+  EXPECT_TRUE(session->configuration().empty());
+  EXPECT_EQ(session->clientProcessName(), "");
+  platform_.sessionRecords.failAll("");
+  session->setServiceType(AudioServiceType::Telephony);
+  session->updateConfigurationWithContentsOfConfiguration(&application);
+  session->setClientProcessName("player");
+  EXPECT_EQ(told(), (Calls{"created 1", "described 1", "described 1", "described 1"}));
+}
+
 TEST_F(SessionChronicle, APeriodThatThereIsNoMemoryToTellOfDoesNotBegin) {
   const auto session = makeSession();
   platform_.sessionRecords.failAll("started");
