@@ -89,7 +89,7 @@ TEST_F(DiagnosticTools, AFaultyCallPromptsOnceInTheBackOffOverARestart) {
   EXPECT_EQ(prompts[0].payload, draft);
   EXPECT_EQ(prompts[0].detail.at("reason"), "a Parley spatial positioning error occurred");
   EXPECT_TRUE(prompts[0].detail.at("process").get<std::string>().starts_with("tarnreporting"));
-  EXPECT_TRUE(eventually([&] { return logSays("Successfully created draft"); }));
+  EXPECT_TRUE(logWillSay("Successfully created draft"));
   const Finished stored = ctl({"defaults", "read", kSuite, "ParleyInvalidXyTatlastRun"});
   EXPECT_EQ(stored.status, 0);
   EXPECT_GT(json::parse(stored.output).get<double>(), 1.7e9);

@@ -27,7 +27,7 @@ TEST_F(RecorderFile, AFileThatIsNoDatabaseIsSetAsideAndAFreshOneBegun) {
   ASSERT_TRUE(startService());
   play("{\"op\":\"sendMessage\",\"category\":4,\"type\":1,\"message\":{}}\n");
   EXPECT_EQ(eventsOnceThereAre(2, "*.Playback.Start").size(), 2U);
-  EXPECT_TRUE(logSays(" error ")) << serviceLog();
+  EXPECT_TRUE(logWillSay(" error ")) << serviceLog();
   bool isKept = false;
   for (const auto& entry : std::filesystem::directory_iterator(state())) {
     isKept = isKept || (entry.is_regular_file() && entry.path() != database() && contentOf(entry.path()) == junk);
@@ -88,7 +88,7 @@ TEST_F(RecorderFile, AReaderThatHoldsUpTheLogIsNamedOnceAndLosesNobodyAnything) 
   constexpr int kMessages = 700;  // twice their bytes, as each is two events
   send(1, kMessages);
   const std::string held = "held up by readers of an old state: process " + std::to_string(::getpid()) + " (tests_e2e)";
-  EXPECT_TRUE(eventually([&] { return logSays(held); })) << serviceLog();
+  EXPECT_TRUE(logWillSay(held)) << serviceLog();
   EXPECT_EQ(serviceLog().find(held), serviceLog().rfind(held));
   ASSERT_EQ(reader.run("COMMIT"), SQLITE_OK);
   reader.close();

@@ -84,7 +84,7 @@ TEST_F(Rtc, ASessionIsMirroredFromItsStartToItsFlush) {
   EXPECT_EQ(found.back().name, "flush");
   EXPECT_EQ(found.back().payload, json::object());
   EXPECT_EQ(found.back().detail, (json{{"session", 1}}));
-  EXPECT_TRUE(logSays("tarnri TarnReportingSessionRtcWorker:"));
+  EXPECT_TRUE(logWillSay("tarnri TarnReportingSessionRtcWorker:"));
 }
 
 TEST_F(Rtc, EachSessionHasItsNumberAndARunCountsFromOne) {
@@ -135,7 +135,7 @@ TEST_F(Rtc, WithoutATokenNothingIsMirrored) {
   playSession("haptics");
   ledgerAtRest();
   EXPECT_TRUE(rtcEvents().empty());
-  EXPECT_TRUE(logSays("newHierarchyTokenFromParentToken returned nil. Will skip rtc for this session. "));
+  EXPECT_TRUE(logWillSay("newHierarchyTokenFromParentToken returned nil. Will skip rtc for this session. "));
 }
 
 TEST_F(Rtc, WithoutAListTheSessionIsMadeAndNothingSent) {
@@ -143,16 +143,16 @@ TEST_F(Rtc, WithoutAListTheSessionIsMadeAndNothingSent) {
   playSession("haptics");
   ledgerAtRest();
   EXPECT_EQ(names(rtcEvents()), (std::vector<std::string>{"createSession"}));
-  EXPECT_TRUE(logSays("no backends found, this session won't get sent to the server"));
-  EXPECT_TRUE(logSays("failed to find backend"));
-  EXPECT_TRUE(logSays("Session never started. "));
+  EXPECT_TRUE(logWillSay("no backends found, this session won't get sent to the server"));
+  EXPECT_TRUE(logWillSay("failed to find backend"));
+  EXPECT_TRUE(logWillSay("Session never started. "));
 }
 
 TEST_F(Rtc, AnEmptyListWillDo) {
   ASSERT_TRUE(startConfigured("[rtc]\nbackends = []\n"));
   playSession("haptics");
   ledgerAtRest();
-  EXPECT_TRUE(logSays("list of backends ()"));
+  EXPECT_TRUE(logWillSay("list of backends ()"));
   EXPECT_EQ(rtcEvents().back().name, "flush");
 }
 
@@ -183,7 +183,7 @@ TEST_F(Rtc, ACompletionBehindNineSecondsIsTooLate) {
   ASSERT_TRUE(eventually([this] { return logSays("timed out waiting for backends"); }, std::chrono::seconds(15)));
   ledgerAtRest();
   EXPECT_EQ(names(rtcEvents()), (std::vector<std::string>{"createSession"}));
-  EXPECT_TRUE(logSays("Session never started. stop"));
+  EXPECT_TRUE(logWillSay("Session never started. stop"));
   EXPECT_EQ(stopService(SIGTERM), 0);
 }
 
@@ -233,7 +233,7 @@ TEST_F(Rtc, TheEndDoesNotWaitForASlowService) {
   const auto begin = std::chrono::steady_clock::now();
   EXPECT_EQ(stopService(SIGTERM), 0);
   EXPECT_LT(std::chrono::steady_clock::now() - begin, std::chrono::seconds(4));
-  EXPECT_TRUE(logSays("pieces of work of the workers' queues are left undone")) << serviceLog();
+  EXPECT_TRUE(logWillSay("pieces of work of the workers' queues are left undone")) << serviceLog();
 }
 
 }  // namespace

@@ -71,8 +71,8 @@ TEST_F(SummaryFile, ATestSessionLeavesItUnderTheConfiguredDirectory) {
   EXPECT_TRUE(file.front().contains("Setup_Start_1"));
   const json& last = file.back();
   EXPECT_TRUE(last.contains("Session_Generic_Summary_1")) << last;
-  EXPECT_TRUE(logSays("dataWithJSONObject: "));
-  EXPECT_TRUE(logSays("SummaryJsonFileWorker closed file. action=close file=" + elsewhere));
+  EXPECT_TRUE(logWillSay("dataWithJSONObject: "));
+  EXPECT_TRUE(logWillSay("SummaryJsonFileWorker closed file. action=close file=" + elsewhere));
 }
 
 TEST_F(SummaryFile, OtherSessionsLeaveNone) {
@@ -126,8 +126,8 @@ TEST_F(SummaryFile, ADirectoryThatCannotBeMadeIsLoggedAndTheSessionEndsAsUsual) 
   ASSERT_TRUE(startService({"--config", directory_ / "config.toml"}));
   playSession("test");
   EXPECT_TRUE(
-      logSays("can't create logging directory at " + directory_ / "file" + "/DiagnosticLogs/Audio/Reporting: "));
-  EXPECT_TRUE(logSays("SummaryJsonFileWorker failed to open file. action=open file="));
+      logWillSay("can't create logging directory at " + directory_ / "file" + "/DiagnosticLogs/Audio/Reporting: "));
+  EXPECT_TRUE(logWillSay("SummaryJsonFileWorker failed to open file. action=open file="));
   EXPECT_EQ(eventsOnceThereAre(1, "sys.oxbow.tarnkit.Session_Generic.Summary").size(), 1U);
 }
 

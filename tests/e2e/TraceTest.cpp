@@ -95,7 +95,7 @@ TEST_F(Trace, ATestSessionOnAnInternalBuildLeavesATraceAndItsMeasurements) {
             json::parse(R"({"name": "@tdg-perf.database_id", "members": {"InfluxDB": "TarnReporter"}})"));
   EXPECT_EQ(filesIn(traces(), ".json").size(), 1U);
   EXPECT_TRUE(fs::is_empty(state() + "/tmp"));
-  EXPECT_TRUE(logSays("Performance Trace Completed: " + traces()));
+  EXPECT_TRUE(logWillSay("Performance Trace Completed: " + traces()));
 }
 
 TEST_F(Trace, TheConfigurationNamesTheFileAndEachSessionIsMeasuredAnew) {
@@ -124,7 +124,8 @@ TEST_F(Trace, OtherBuildsTraceNothing) {
 TEST_F(Trace, WithoutItsDescriptionsASessionIsNotTracedAndEndsAsUsual) {
   ASSERT_TRUE(startInternalService());
   playSession({{"TarnReportingSkeinPlistFilePath", "/none"}});
-  EXPECT_TRUE(logSays("Could not start PerformanceTrace. TarnReportingSkeinPlistFilePath: /none is not a valid path"));
+  EXPECT_TRUE(
+      logWillSay("Could not start PerformanceTrace. TarnReportingSkeinPlistFilePath: /none is not a valid path"));
   EXPECT_FALSE(fs::exists(traces()));
   EXPECT_EQ(eventsOnceThereAre(1, "sys.oxbow.tarnkit.Session_Generic.Summary").size(), 1U);
 }
@@ -133,7 +134,8 @@ TEST_F(Trace, BrokenDescriptionsLeaveTheTraceAndNoMeasurements) {
   ASSERT_TRUE(startInternalService());
   writeFile(directory_ / "probes.plist", "<plist>\n<dict>");
   playSession(described());
-  EXPECT_TRUE(logSays("line 2: the end comes too early failed to get SkeinProbes from " + directory_ / "probes.plist"));
+  EXPECT_TRUE(
+      logWillSay("line 2: the end comes too early failed to get SkeinProbes from " + directory_ / "probes.plist"));
   EXPECT_TRUE(filesIn(traces(), ".pdj").empty());
   EXPECT_EQ(filesIn(traces(), ".json").size(), 1U);
 }
@@ -151,7 +153,7 @@ TEST_F(Trace, AMissingAnalysisLibraryEndsTheServiceOnceItsEventsAreCommitted) {
 )";
   EXPECT_NE(ctl({"run"}, script).status, 0);
   EXPECT_EQ(service().wait(), 1);
-  EXPECT_TRUE(logSays("Unable to find class SkeinTraceModel"));
+  EXPECT_TRUE(logWillSay("Unable to find class SkeinTraceModel"));
   EXPECT_EQ(events("sys.oxbow.tarnkit.Playback.Start").size(), 1U);
 }
 

@@ -188,7 +188,7 @@ TEST_F(AdminSocket, AReloadTellsThatItWaitsForARestart) {
   ASSERT_TRUE(startService({"--config", directory_ / "c.toml"}));
   writeFile(directory_ / "c.toml", "[access]\nadmin = \"separate\"\n");
   service().signal(SIGHUP);
-  EXPECT_TRUE(eventually([this] { return logSays("access.admin"); }));
+  EXPECT_TRUE(logWillSay("access.admin"));
   EXPECT_EQ(ctl({"kill"}).status, 0);
   EXPECT_EQ(service().wait(), 2);
 }

@@ -48,9 +48,6 @@ class Reload : public ServiceFixture {
     return startService({"--config", file()});
   }
   // The log is written by a thread of its own.
-  bool logWillSay(const std::string& text) {
-    return eventually([&] { return logSays(text); });
-  }
   // Another file and the signal; waits until the service has looked at it, and gives the status then.
   json reload(const std::string& configuration) {
     writeFile(file(), configuration);
@@ -106,7 +103,7 @@ TEST_F(Reload, TheLevelOfTheLogChangesUnlessAnOptionSaysIt) {
   ASSERT_TRUE(startWith("[log]\nlevel = \"error\"\n"));
   EXPECT_FALSE(logSays(" default "));
   reload("[log]\nlevel = \"debug\"\n");
-  EXPECT_TRUE(eventually([this] { return logSays("configuration 1 is in force, changed: log.level"); }));
+  EXPECT_TRUE(logWillSay("configuration 1 is in force, changed: log.level"));
   ASSERT_EQ(stopService(SIGTERM), 0);
   ASSERT_TRUE(startService({"--config", file(), "--log-level", "error"}));
   reload("[log]\nlevel = \"default\"\n");

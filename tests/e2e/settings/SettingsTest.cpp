@@ -12,9 +12,6 @@ namespace {
 
 class Settings : public ServiceFixture {
  protected:
-  bool waitForLog(const std::string& text) {
-    return eventually([&] { return logSays(text); });
-  }
 };
 
 TEST_F(Settings, ReportingIsOffWhenTheDefaultsSaySo) {
@@ -75,7 +72,7 @@ TEST_F(Settings, AChangeOfADefaultReachesTheRunningServiceWithItsNotification) {
   ASSERT_TRUE(startService({"--log-level", "debug"}));
   ASSERT_EQ(ctl({"defaults", "write", "sys.oxbow.tarnkit", "device_name", "\"kitchen\""}).status, 0);
   ASSERT_EQ(ctl({"notify", "sys.oxbow.tarnkit.reporting"}).status, 0);
-  EXPECT_TRUE(waitForLog("Updating value featureName=device_name"));
+  EXPECT_TRUE(logWillSay("Updating value featureName=device_name"));
 }
 
 TEST_F(Settings, WhoCanConnectFindsTheNotificationsHeard) {
@@ -83,7 +80,7 @@ TEST_F(Settings, WhoCanConnectFindsTheNotificationsHeard) {
   for (int round = 0; round < 10; ++round) {
     ASSERT_TRUE(startService({"--log-level", "debug"}));
     ASSERT_EQ(ctl({"notify", "sys.oxbow.homeshell.ringerstate", "--state", "1"}).status, 0);
-    ASSERT_TRUE(waitForLog("Updating value featureName=ringerstate"));
+    ASSERT_TRUE(logWillSay("Updating value featureName=ringerstate"));
     ASSERT_EQ(stopService(SIGTERM), 0);
   }
 }
@@ -91,7 +88,7 @@ TEST_F(Settings, WhoCanConnectFindsTheNotificationsHeard) {
 TEST_F(Settings, AStateWordReachesTheRunningService) {
   ASSERT_TRUE(startService({"--log-level", "debug"}));
   ASSERT_EQ(ctl({"notify", "sys.oxbow.homeshell.ringerstate", "--state", "1"}).status, 0);
-  EXPECT_TRUE(waitForLog("Updating value featureName=ringerstate"));
+  EXPECT_TRUE(logWillSay("Updating value featureName=ringerstate"));
 }
 
 TEST_F(Settings, ABrokenDefaultsFileIsLoggedReadAsEmptyAndLeftAlone) {
@@ -99,7 +96,7 @@ TEST_F(Settings, ABrokenDefaultsFileIsLoggedReadAsEmptyAndLeftAlone) {
   const std::string broken = "{\n  \"disable_reporting\": true,\n  oops\n";
   writeFile(path, broken);
   ASSERT_TRUE(startService());
-  EXPECT_TRUE(waitForLog(path + ":3:")) << serviceLog();
+  EXPECT_TRUE(logWillSay(path + ":3:")) << serviceLog();
   const auto replies = play(R"({"op":"createReportingSession","reporterID":1}
 {"op":"sendMessage","reporterIDs":[1],"category":1,"type":1,"message":{}}
 )");
@@ -219,14 +216,14 @@ TEST_F(SettingsInASession, ANotificationWithoutAChangeBringsNoMessage) {
 TEST_F(SettingsInASession, AStoppedSessionHearsOfNoSetting) {
   ASSERT_TRUE(client_->call(client::stopReportingSessionForID(1)).ok());
   ASSERT_EQ(ctl({"notify", "sys.oxbow.homeshell.ringerstate", "--state", "1"}).status, 0);
-  ASSERT_TRUE(eventually([&] { return logSays("Updating value featureName=ringerstate"); }));
+  ASSERT_TRUE(logWillSay("Updating value featureName=ringerstate"));
   EXPECT_TRUE(settings(0).empty());
 }
 
 TEST_F(SettingsInASession, ASecondStartBringsTheSettingsThatAreKnown) {
   ASSERT_TRUE(client_->call(client::stopReportingSessionForID(1)).ok());
   ASSERT_EQ(ctl({"notify", "sys.oxbow.homeshell.ringerstate", "--state", "2"}).status, 0);
-  ASSERT_TRUE(eventually([&] { return logSays("Updating value featureName=ringerstate"); }));
+  ASSERT_TRUE(logWillSay("Updating value featureName=ringerstate"));
   startSession();
   const auto payloads = settings(1);
   ASSERT_EQ(payloads.size(), 1U);

@@ -46,6 +46,10 @@ bool ServiceFixture::logSays(const std::string& text) const {
   return serviceLog().find(text) != std::string::npos;
 }
 
+bool ServiceFixture::logWillSay(const std::string& text) const {
+  return eventually([&] { return logSays(text); });
+}
+
 std::unique_ptr<Process> ServiceFixture::startCtl(const std::vector<std::string>& words, const std::string& input,
                                                   int outputFd) {
   Process::Setup setup;

@@ -38,6 +38,8 @@ class ServiceFixture : public ::testing::Test {
   Process& service() { return *service_; }
   std::string serviceLog() const { return service_->complaints(); }
   bool logSays(const std::string& text) const;
+  // The same, or soon: the log is written by a thread of its own, and a reply may overtake its lines.
+  bool logWillSay(const std::string& text) const;
 
   // tarnreportingctl with the service's socket and state directory.
   Finished ctl(const std::vector<std::string>& words, const std::string& input = {});
