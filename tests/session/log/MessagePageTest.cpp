@@ -101,8 +101,9 @@ TEST_F(MessagePage, InTheStoreItTakesNextToNoMemory) {
   for (int count = 0; count < 16; ++count) {
     pages.push_back(pageOf({large}));
   }
-  // The store is in memory, here.
-  EXPECT_LT(heap.bytes() - static_cast<std::ptrdiff_t>(platform_.overflow.bytes()), 100'000);
+  // The store is in memory, here, and an allocator may round its texts up by a sixth. Kept pages would be sixteen
+  // texts more.
+  EXPECT_LT(heap.bytes() - static_cast<std::ptrdiff_t>(platform_.overflow.bytes()), 400'000);
 }
 
 TEST_F(MessagePage, WhatItTakesInTheStoreIsCountedUntilItsEnd) {
