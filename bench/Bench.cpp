@@ -32,6 +32,7 @@ struct Figure {
 constexpr Figure kFigures[] = {
     {"round-trip-pinned", &measureRoundTripOnOneProcessor},
     {"round-trip", &measureRoundTrip},
+    {"turns", &measureTurns},
     {"stream", &measureStream},
     {"gathered", &measureGathered},
     {"recorded", &measureRecorded},

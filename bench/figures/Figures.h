@@ -9,6 +9,7 @@ namespace tarn::bench {
 
 void measureRoundTripOnOneProcessor(const Settings& settings, Table& table);
 void measureRoundTrip(const Settings& settings, Table& table);
+void measureTurns(const Settings& settings, Table& table);
 void measureStream(const Settings& settings, Table& table);
 void measureGathered(const Settings& settings, Table& table);
 void measureRecorded(const Settings& settings, Table& table);

@@ -1,6 +1,9 @@
 // SPDX-License-Identifier: Apache-2.0
 // One message and its reply at a time: on one processor, where it is all work and no waking of another processor, and
 // where the scheduler puts the processes.
+#include <initializer_list>
+#include <optional>
+
 #include "bench/Measure.h"
 #include "bench/ServiceReceiver.h"
 #include "bench/figures/Figures.h"
@@ -32,6 +35,7 @@ class Trips {
     }
     medians_.push_back(percentile(samples, 0.5));
     tails_.push_back(percentile(std::move(samples), 0.99));
+    receiver_.forget();
   }
   // A sample of each round.
   const Samples& medians() const { return medians_; }
@@ -54,6 +58,19 @@ struct AllResults {
   Results bus;
 };
 
+// Takes turns; what comes before the rounds isn't counted, since caches and branches learn.
+void measureInTurns(const Settings& settings, std::initializer_list<Trips*> all) {
+  const std::size_t count = settings.count(kTrips);
+  for (Trips* trips : all) {
+    Trips(*trips).measure(count / 10 + 1);
+  }
+  for (int round = 0; round < settings.rounds; ++round) {
+    for (Trips* trips : all) {
+      trips->measure(count);
+    }
+  }
+}
+
 AllResults measureAll(const Settings& settings) {
   ServiceReceiver service(settings, {}, Writes::OneEach);
   BareReceiver bare(Writes::OneEach);
@@ -61,16 +78,7 @@ AllResults measureAll(const Settings& settings) {
   Trips ours(service);
   Trips bareTrips(bare);
   Trips busTrips(bus);
-  const std::size_t count = settings.count(kTrips);
-  for (Trips* trips : {&ours, &bareTrips, &busTrips}) {
-    Trips(*trips).measure(count / 10 + 1);  // not counted: caches and branches learn
-  }
-  for (int round = 0; round < settings.rounds; ++round) {
-    for (Trips* trips : {&ours, &bareTrips, &busTrips}) {
-      trips->measure(count);
-    }
-    service.forget();
-  }
+  measureInTurns(settings, {&ours, &bareTrips, &busTrips});
   return {
       {ours.medians(), ours.tails()}, {bareTrips.medians(), bareTrips.tails()}, {busTrips.medians(), busTrips.tails()}};
 }
@@ -110,6 +118,33 @@ void measureRoundTrip(const Settings& settings, Table& table) {
   table.addWithTarget(middle, ratio, kPlacedTarget);
   table.add(row("median", "sd-bus", all.ours.middle, all.bus.middle));
   table.add(row("p99", "bare", all.ours.tail, all.bare.tail));
+}
+
+// Without a service: what a loop that answers a lone client could gain by waiting in another way.
+void measureTurns(const Settings& settings, Table& table) {
+  const OneProcessor one;
+  BareReceiver receive(Writes::OneEach);
+  BareReceiver epoll(Writes::OneEach, BareTurn::Epoll);
+  Trips receiveTrips(receive);
+  Trips epollTrips(epoll);
+  std::optional<BareReceiver> ring;
+  std::optional<Trips> ringTrips;
+  if (isThere(BareTurn::Ring)) {
+    ring.emplace(Writes::OneEach, BareTurn::Ring);
+    ringTrips.emplace(*ring);
+    measureInTurns(settings, {&receiveTrips, &epollTrips, &*ringTrips});
+  } else {
+    measureInTurns(settings, {&receiveTrips, &epollTrips});
+  }
+  const auto add = [&](const std::string& way, const Trips& trips) {
+    table.add(rowOf("round trip, one processor, bare by " + way, "bare", trips.medians(), receiveTrips.medians()));
+    table.add(
+        rowOf("round trip, one processor, bare by " + way + ", p99", "bare", trips.tails(), receiveTrips.tails()));
+  };
+  add("epoll", epollTrips);
+  if (ringTrips) {
+    add("io_uring", *ringTrips);
+  }
 }
 
 }  // namespace tarn::bench

@@ -5,7 +5,6 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <cstring>
 
 #include "bench/Message.h"
 #include "wire/Encoder.h"
@@ -22,55 +21,13 @@ std::string makeReply() {
   return reply;
 }
 
-void sendAll(int socket, std::string_view bytes) {
-  while (!bytes.empty()) {
-    const ssize_t sent = ::send(socket, bytes.data(), bytes.size(), MSG_NOSIGNAL);
-    if (sent <= 0) {
-      std::_Exit(EXIT_FAILURE);
-    }
-    bytes.remove_prefix(static_cast<std::size_t>(sent));
-  }
-}
-
-// The whole frames at the front of the bytes: how many, and where they end.
-std::size_t countFrames(std::string_view bytes, std::size_t& end) {
-  std::size_t frames = 0;
-  end = 0;
-  while (bytes.size() - end >= wire::kFrameHeaderBytes) {
-    std::uint32_t length = 0;
-    std::memcpy(&length, bytes.data() + end, sizeof length);
-    if (bytes.size() - end - wire::kFrameHeaderBytes < length) break;
-    end += wire::kFrameHeaderBytes + length;
-    ++frames;
-  }
-  return frames;
-}
-
-void serve(int socket) {
-  const std::string reply = makeReply();
-  std::string input(2 * kGulpBytes, '\0');
-  std::string replies;
-  std::size_t pending = 0;
-  for (;;) {
-    const ssize_t received = ::recv(socket, input.data() + pending, kGulpBytes, 0);
-    if (received <= 0) return;
-    pending += static_cast<std::size_t>(received);
-    std::size_t end = 0;
-    const std::size_t frames = countFrames(std::string_view(input).substr(0, pending), end);
-    std::memmove(input.data(), input.data() + end, pending - end);
-    pending -= end;
-    replies.clear();
-    for (std::size_t i = 0; i < frames; ++i) {
-      replies += reply;
-    }
-    sendAll(socket, replies);
-  }
-}
-
 }  // namespace
 
-BareReceiver::BareReceiver(Writes writes)
-    : writes_(writes), child_([this] { serve(ends_.theirs); }), frame_(makeFrame(1)), received_(kGulpBytes, '\0') {
+BareReceiver::BareReceiver(Writes writes, BareTurn turn)
+    : writes_(writes),
+      child_([this, turn] { serve(turn, ends_.theirs); }),
+      frame_(makeFrame(1)),
+      received_(kGulpBytes, '\0') {
   ::close(ends_.theirs);
 }
 

@@ -7,12 +7,13 @@
 
 #include "bench/Processes.h"
 #include "bench/Receiver.h"
+#include "bench/peers/BareTurns.h"
 
 namespace tarn::bench {
 
 class BareReceiver final : public Receiver {
  public:
-  explicit BareReceiver(Writes writes);
+  explicit BareReceiver(Writes writes, BareTurn turn = BareTurn::Receive);
   ~BareReceiver() override;
   BareReceiver(const BareReceiver&) = delete;
   BareReceiver& operator=(const BareReceiver&) = delete;
